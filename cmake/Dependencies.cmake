@@ -1,0 +1,20 @@
+# Every library from outside, found in one place. ARCHITECTURE.md says what each is for.
+find_package(Threads REQUIRED)
+find_package(PkgConfig REQUIRED)
+find_package(OpenSSL 3.0 REQUIRED)
+find_package(CURL 7.85 REQUIRED)
+find_package(fmt REQUIRED)
+find_package(nlohmann_json 3.10 REQUIRED)
+pkg_check_modules(GIO REQUIRED IMPORTED_TARGET gio-2.0>=2.66)
+pkg_check_modules(PLIST REQUIRED IMPORTED_TARGET libplist-2.0)
+
+# The local record service alone.
+find_package(SQLiteCpp REQUIRED)
+find_package(SQLite3 REQUIRED)
+find_package(CLI11 REQUIRED)
+pkg_check_modules(HTTPLIB REQUIRED IMPORTED_TARGET cpp-httplib>=0.11)
+
+if(PINWELL_BUILD_TESTS)
+  find_package(GTest REQUIRED)
+  include(GoogleTest)
+endif()

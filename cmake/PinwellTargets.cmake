@@ -1,0 +1,24 @@
+# The three kinds of target in this tree, each built alike everywhere.
+
+# pinwell_library(NAME SOURCES...): the static library of one folder. Its headers are included as
+# "folder/header.h" from the folder above, which keeps every dependency visible in the source.
+function(pinwell_library name)
+  add_library(${name} STATIC ${ARGN})
+  target_include_directories(${name} PUBLIC ${CMAKE_CURRENT_SOURCE_DIR}/..)
+  target_link_libraries(${name} PRIVATE pinwell_warnings pinwell_hardening PUBLIC pinwell_sanitizers)
+endfunction()
+
+# pinwell_executable(NAME SOURCES...): a program, in <build>/bin.
+function(pinwell_executable name)
+  add_executable(${name} ${ARGN})
+  target_link_libraries(${name} PRIVATE pinwell_warnings pinwell_hardening pinwell_sanitizers)
+endfunction()
+
+# pinwell_test(NAME SOURCES...): a GoogleTest program; every test in it is a ctest of its own.
+function(pinwell_test name)
+  add_executable(${name} ${ARGN})
+  set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/tests)
+  target_link_libraries(${name} PRIVATE pinwell_warnings pinwell_sanitizers test_support
+                        GTest::gmock GTest::gtest_main)
+  gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST PROPERTIES TIMEOUT 120)
+endfunction()

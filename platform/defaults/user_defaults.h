@@ -1,0 +1,34 @@
+// User defaults: one JSON object a domain, $XDG_CONFIG_HOME (or $HOME/.config)/DOMAIN.json.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <string_view>
+
+#include "foundation/value.h"
+
+namespace pinwell::defaults {
+
+/// Longest domain file that is read.
+inline constexpr std::size_t kMaximumDomainFile = 1024 * 1024;
+
+/// One opened domain. A value that is missing or of another type is answered from the registered defaults, value by
+/// value; so is every value when the file is missing or malformed. Not for use by two threads at once.
+class UserDefaults {
+  public:
+    virtual ~UserDefaults() = default;
+    virtual void registerDefaults(foundation::Dictionary defaults) = 0;
+    virtual std::string stringForKey(std::string_view key) = 0;  // empty when neither has it
+    virtual bool boolForKey(std::string_view key) = 0;           // false when neither has it
+};
+
+class UserDefaultsService {
+  public:
+    virtual ~UserDefaultsService() = default;
+    virtual std::unique_ptr<UserDefaults> openDomain(std::string_view domain) = 0;
+};
+
+/// The defaults of the user who runs this process.
+std::unique_ptr<UserDefaultsService> makeUserDefaultsService();
+
+}  // namespace pinwell::defaults

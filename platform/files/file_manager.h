@@ -1,0 +1,143 @@
+// Files as the tool handles them: questions about an item, safe copies and swaps, and file handles.
+//
+// All calls block and may be made from any thread; one handle serves one thread at a time. Errors are of
+// kPOSIXErrorDomain and name the path. Nothing is ever written through a symbolic link in the last path component.
+#pragma once
+
+#include <functional>
+#include <memory>
+#include <stdexcept>
+#include <string>
+
+#include "foundation/error.h"
+#include "foundation/url.h"
+
+namespace pinwell::files {
+
+using foundation::ByteView;
+using foundation::Data;
+using foundation::Dictionary;
+using foundation::Result;
+using foundation::URL;
+
+/// What the path itself is; its last component's link is not followed.
+struct ItemFacts {
+    std::string name;  // last path component
+    bool isDirectory = false;
+    bool isRegularFile = false;
+    bool isSymbolicLink = false;
+    bool isExecutable = false;  // any execute bit
+};
+
+/// What the type service says of an item.
+struct ItemType {
+    std::string identifier;
+    std::string localizedDescription;
+    bool isPackage = false;
+    bool isApplication = false;
+};
+
+/// How the file manager asks for an item's type; put in by whoever builds it.
+using TypeNaming = std::function<ItemType(const ItemFacts&)>;
+
+struct ResourceProperties {
+    bool isDirectory = false;
+    bool isPackage = false;
+    bool isApplication = false;
+    bool isSymbolicLink = false;
+    std::string typeIdentifier;
+    std::string localizedTypeDescription;
+
+    /// All six under their property names, for the verbose dump.
+    Dictionary dictionary() const;
+};
+
+/// A file handle's failure. `what()` is the reason text: what was tried, on which file, and the system's word.
+class FileHandleError : public std::runtime_error {
+  public:
+    using std::runtime_error::runtime_error;
+};
+
+/// An open file. The operations throw FileHandleError; the destructor closes and swallows what goes wrong then.
+class FileHandle {
+  public:
+    virtual ~FileHandle() = default;
+
+    /// Both answer the new position, in bytes from the start.
+    virtual std::uint64_t seekToEnd() = 0;
+    virtual std::uint64_t seek(std::uint64_t position) = 0;
+    virtual std::uint64_t position() = 0;
+
+    /// Up to `length` bytes; fewer only at the end of the file. Memory grows with what is really read.
+    virtual Data read(std::uint64_t length) = 0;
+
+    /// Writes all of `bytes`.
+    virtual void write(ByteView bytes) = 0;
+
+    virtual void truncate(std::uint64_t length) = 0;
+
+    /// Returns when the file's data and metadata are on stable storage.
+    virtual void synchronize() = 0;
+
+    /// Closes and reports. Further calls are errors; closing twice is none.
+    virtual void close() = 0;
+};
+
+/// Longest file that is ever read whole: no ticket, nor anything else that is read so, comes near it.
+inline constexpr std::uint64_t kMaximumWholeFile = 64ULL * 1024 * 1024;
+
+class FileManager {
+  public:
+    virtual ~FileManager() = default;
+
+    /// The six properties in one request.
+    virtual Result<ResourceProperties> resourceProperties(const URL& item) = 0;
+
+    /// The item itself, not what a link leads to.
+    virtual Result<bool> isRegularFile(const URL& item) = 0;
+
+    /// Main executable of the directory, opened as a bundle.
+    virtual std::optional<URL> mainExecutableOfBundle(const URL& directory) = 0;
+
+    /// Whether the file system can clone that very file (reflink), found by asking it. Leaves nothing behind.
+    virtual Result<bool> volumeSupportsCloning(const URL& item) = 0;
+
+    /// A fresh directory of mode 0700 beside `item`.
+    virtual Result<URL> createReplacementDirectory(const URL& item) = 0;
+
+    /// A copy at `destination`, which must not exist: a clone where that can be; carries mode, owner where
+    /// permitted, extended attributes, access control list and times. A failed copy leaves nothing there.
+    /// Regular files only (EINVAL, or EISDIR).
+    virtual Result<void> copyItem(const URL& source, const URL& destination) = 0;
+
+    /// A file, a link, or a directory with all that is in it.
+    virtual Result<void> removeItem(const URL& item) = 0;
+
+    /// Puts `replacement` in the place of `original` with one rename, after carrying over the original's metadata,
+    /// durable before it returns. Afterwards the replacement's old path holds nothing, and the replacement
+    /// directory it stood in, when it is one of createReplacementDirectory's, is gone.
+    virtual Result<void> replaceItem(const URL& original, const URL& replacement) = 0;
+
+    /// Moves the item to the user's trash; answers where it is now.
+    virtual Result<URL> trashItem(const URL& item) = 0;
+
+    /// The whole of a regular file of at most kMaximumWholeFile bytes (EFBIG). Follows no link in the last component
+    /// (ELOOP), never blocks on what is not a regular file (EINVAL, EISDIR).
+    virtual Result<Data> contentsOfFile(const URL& file) = 0;
+
+    /// Writes a file of mode 0600. Atomically: to a file beside it that is then renamed into place, replacing
+    /// whatever non-directory is there. Otherwise plainly: a new file, or an existing regular file overwritten.
+    enum class Writing { plain, atomic };
+    virtual Result<void> writeFile(ByteView contents, const URL& file, Writing writing) = 0;
+
+    /// Close-on-exec, no link followed in the last component. Opens regular files only; never blocks.
+    virtual Result<std::unique_ptr<FileHandle>> openForReading(const URL& file) = 0;
+    virtual Result<std::unique_ptr<FileHandle>> openForUpdating(const URL& file) = 0;
+
+    virtual URL temporaryDirectory() = 0;
+};
+
+/// The file manager of this machine.
+std::unique_ptr<FileManager> makeLocalFileManager(TypeNaming typeNaming);
+
+}  // namespace pinwell::files

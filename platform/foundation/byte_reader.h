@@ -1,0 +1,69 @@
+// The one bounds-checked cursor over bytes that came from outside.
+//
+// Nothing else in the tree indexes raw input. Every check compares the wanted length with what remains, so no
+// sum of two numbers from a file is ever formed, and every read says what it was reading, so that a refusal can
+// name the field and its offset.
+#pragma once
+
+#include <cstdint>
+#include <stdexcept>
+#include <string>
+#include <string_view>
+
+#include "foundation/bytes.h"
+
+namespace pinwell::foundation {
+
+/// Fewer bytes remained than a read asked for. Parsers catch it at their public boundary.
+class ShortRead : public std::runtime_error {
+  public:
+    ShortRead(std::string_view what, std::size_t offset, std::size_t wanted, std::size_t remaining);
+
+    /// Where in the outermost buffer the read began.
+    std::size_t offset() const noexcept { return offset_; }
+
+  private:
+    std::size_t offset_;
+};
+
+/// A forward cursor. It owns nothing: the bytes must outlive it and every view it hands out.
+/// The multi-byte reads assemble their value from single bytes, so alignment and host order do not matter.
+/// Throws ShortRead, and then has not moved.
+class ByteReader {
+  public:
+    /// `base` is the offset of `bytes` in the buffer that messages should speak of.
+    explicit ByteReader(ByteView bytes, std::size_t base = 0) noexcept : bytes_(bytes), base_(base) {}
+
+    std::size_t position() const noexcept { return position_; }
+    std::size_t remaining() const noexcept { return bytes_.size() - position_; }
+    bool atEnd() const noexcept { return remaining() == 0; }
+
+    std::uint8_t u8(std::string_view what);
+    std::uint16_t be16(std::string_view what);
+    std::uint32_t be32(std::string_view what);
+    std::uint64_t be64(std::string_view what);
+    std::uint16_t le16(std::string_view what);
+    std::uint32_t le32(std::string_view what);
+    std::uint64_t le64(std::string_view what);
+
+    /// The next `length` bytes, not copied.
+    ByteView bytes(std::uint64_t length, std::string_view what);
+
+    void skip(std::uint64_t length, std::string_view what) { bytes(length, what); }
+
+    /// Moves to `position`, counted from the start of this reader's bytes.
+    void seek(std::uint64_t position, std::string_view what);
+
+    /// A reader over `length` bytes at `offset` of this reader's bytes; this reader does not move.
+    ByteReader sub(std::uint64_t offset, std::uint64_t length, std::string_view what) const;
+
+  private:
+    std::uint64_t bigEndian(std::size_t width, std::string_view what);
+    std::uint64_t littleEndian(std::size_t width, std::string_view what);
+
+    ByteView bytes_;
+    std::size_t base_;
+    std::size_t position_ = 0;
+};
+
+}  // namespace pinwell::foundation

@@ -1,0 +1,172 @@
+#include "foundation/description.h"
+
+#include <fmt/format.h>
+
+#include <algorithm>
+
+namespace pinwell::foundation {
+namespace {
+
+// A byte buffer longer than this shows its first and last bytes only.
+constexpr std::size_t kWholeExcerpt = 24;
+constexpr std::size_t kExcerptHead = 16;
+constexpr std::size_t kExcerptTail = 4;
+
+constexpr unsigned kIndentStep = 4;
+
+// Length of the well-formed UTF-8 sequence (RFC 3629) at the front of `text`, or 0.
+std::size_t utf8SequenceLength(std::string_view text) {
+    const auto byte = [&](std::size_t i) { return static_cast<unsigned char>(text[i]); };
+    const unsigned char lead = byte(0);
+    if (lead < 0x80) return 1;
+    std::size_t length = 0;
+    unsigned char low = 0x80;
+    unsigned char high = 0xBF;
+    if (lead >= 0xC2 && lead <= 0xDF) {
+        length = 2;
+    } else if (lead >= 0xE0 && lead <= 0xEF) {
+        length = 3;
+        if (lead == 0xE0) low = 0xA0;
+        if (lead == 0xED) high = 0x9F;
+    } else if (lead >= 0xF0 && lead <= 0xF4) {
+        length = 4;
+        if (lead == 0xF0) low = 0x90;
+        if (lead == 0xF4) high = 0x8F;
+    } else {
+        return 0;
+    }
+    if (text.size() < length) return 0;
+    for (std::size_t i = 1; i < length; ++i) {
+        if (byte(i) < low || byte(i) > high) return 0;
+        low = 0x80;
+        high = 0xBF;
+    }
+    return length;
+}
+
+bool isControl(std::string_view sequence) {
+    const auto first = static_cast<unsigned char>(sequence[0]);
+    if (sequence.size() == 1) return first < 0x20 || first == 0x7F;
+    return sequence.size() == 2 && first == 0xC2 && static_cast<unsigned char>(sequence[1]) < 0xA0;  // C1
+}
+
+void appendEscaped(std::string& out, std::string_view bytes) {
+    if (bytes == "\n") out += "\\n";
+    else if (bytes == "\r") out += "\\r";
+    else if (bytes == "\t") out += "\\t";
+    else
+        for (const char c : bytes) out += fmt::format("\\x{:02x}", static_cast<unsigned char>(c));
+}
+
+std::string escape(std::string_view text, std::string_view alsoEscaped) {
+    std::string out;
+    out.reserve(text.size());
+    while (!text.empty()) {
+        const std::size_t length = utf8SequenceLength(text);
+        const std::string_view sequence = text.substr(0, std::max<std::size_t>(length, 1));
+        if (length == 0 || isControl(sequence)) {
+            appendEscaped(out, sequence);
+        } else {
+            if (alsoEscaped.find(sequence[0]) != std::string_view::npos) out += '\\';
+            out += sequence;
+        }
+        text.remove_prefix(sequence.size());
+    }
+    return out;
+}
+
+std::string indentation(unsigned indent) { return std::string(std::size_t{indent} * kIndentStep, ' '); }
+
+std::string hexWords(ByteView bytes) {
+    std::string text;
+    for (std::size_t i = 0; i < bytes.size(); i += 4) {
+        if (i > 0) text += ' ';
+        text += toHex(bytes.subspan(i, std::min<std::size_t>(4, bytes.size() - i)));
+    }
+    return text;
+}
+
+}  // namespace
+
+std::string escapeForTerminal(std::string_view text) { return escape(text, {}); }
+
+std::string quoteForPropertyList(std::string_view text) {
+    const auto bare = [](char c) {
+        return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') ||
+               std::string_view("._/$-").find(c) != std::string_view::npos;
+    };
+    if (!text.empty() && std::all_of(text.begin(), text.end(), bare)) return std::string(text);
+    return '"' + escape(text, "\"\\") + '"';
+}
+
+std::string describe(ByteView bytes) {
+    if (bytes.empty()) return "{length = 0, bytes = 0x}";
+    if (bytes.size() <= kWholeExcerpt) return fmt::format("{{length = {}, bytes = 0x{}}}", bytes.size(), hexWords(bytes));
+    return fmt::format("{{length = {}, bytes = 0x{} ... {}}}", bytes.size(), hexWords(bytes.first(kExcerptHead)),
+                       hexWords(bytes.last(kExcerptTail)));
+}
+
+std::string describe(const Error& error) {
+    std::string text = fmt::format("Error Domain={} Code={} \"{}\"", escapeForTerminal(error.domain()), error.code(),
+                                   escape(error.localizedFailureReason(), "\"\\"));
+    if (error.userInfo().empty()) return text;
+    text += " UserInfo={";
+    bool first = true;
+    for (const auto& [key, value] : error.userInfo()) {
+        if (!first) text += ", ";
+        first = false;
+        text += escapeForTerminal(key) + "=" + Description<Value>::of(value);
+    }
+    return text + "}";
+}
+
+std::string describe(const Array& array, unsigned indent) {
+    std::string text = "(\n";
+    for (std::size_t i = 0; i < array.size(); ++i) {
+        text += indentation(indent + 1) + array[i].describe(indent + 1);
+        text += i + 1 < array.size() ? ",\n" : "\n";
+    }
+    return text + indentation(indent) + ")";
+}
+
+std::string describe(const Dictionary& dictionary, unsigned indent) {
+    std::string text = "{\n";
+    for (const auto& [key, value] : dictionary)
+        text += indentation(indent + 1) + quoteForPropertyList(key) + " = " + value.describe(indent + 1) + ";\n";
+    return text + indentation(indent) + "}";
+}
+
+std::string Value::describe(unsigned indent) const {
+    struct Visitor {
+        unsigned indent;
+        std::string operator()(std::monostate) const { return std::string(kNilDescription); }
+        std::string operator()(Null) const { return "\"<null>\""; }
+        std::string operator()(bool flag) const { return flag ? "1" : "0"; }
+        std::string operator()(std::int64_t number) const { return fmt::format("{}", number); }
+        std::string operator()(std::uint64_t number) const { return fmt::format("{}", number); }
+        std::string operator()(double number) const {
+            const std::string text = fmt::format("{}", number);
+            return text.find_first_of(".+") == std::string::npos ? text : quoteForPropertyList(text);
+        }
+        std::string operator()(const std::string& text) const { return quoteForPropertyList(text); }
+        std::string operator()(Date date) const { return quoteForPropertyList(toString(date)); }
+        std::string operator()(const std::shared_ptr<const Data>& data) const {
+            return foundation::describe(ByteView(*data));
+        }
+        std::string operator()(const std::shared_ptr<const URL>& url) const {
+            return quoteForPropertyList(url->absoluteString());
+        }
+        std::string operator()(const std::shared_ptr<const Error>& error) const {
+            return quoteForPropertyList(foundation::describe(*error));
+        }
+        std::string operator()(const std::shared_ptr<const Array>& array) const {
+            return foundation::describe(*array, indent);
+        }
+        std::string operator()(const std::shared_ptr<const Dictionary>& dictionary) const {
+            return foundation::describe(*dictionary, indent);
+        }
+    };
+    return std::visit(Visitor{indent}, content_);
+}
+
+}  // namespace pinwell::foundation

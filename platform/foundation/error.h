@@ -1,0 +1,108 @@
+// Failures as values: the error object, and a result that is either a value or an error.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <variant>
+
+#include "foundation/value.h"
+
+namespace pinwell::foundation {
+
+/// Error domains: whose numbering an error's code belongs to.
+inline constexpr std::string_view kPOSIXErrorDomain = "POSIXErrorDomain";        // errno
+inline constexpr std::string_view kOSStatusErrorDomain = "OSStatusErrorDomain";  // platform status numbers
+inline constexpr std::string_view kURLErrorDomain = "URLErrorDomain";            // https/session.h
+inline constexpr std::string_view kDataErrorDomain = "DataErrorDomain";          // malformed documents
+
+/// User-information keys.
+inline constexpr std::string_view kFilePathKey = "FilePath";
+inline constexpr std::string_view kURLKey = "FailingURL";
+inline constexpr std::string_view kUnderlyingErrorKey = "UnderlyingError";
+
+/// The platform's status for a bad parameter.
+inline constexpr std::int32_t kParameterError = -50;
+
+/// Why something failed. A value; an error that may be missing is a `std::optional<Error>`.
+class Error {
+  public:
+    Error(std::string_view domain, std::int64_t code, std::string text, Dictionary userInfo = {});
+
+    /// An errno value, with the path it concerns.
+    static Error posix(int number, std::string_view path = {});
+
+    /// A platform status; the text names the common ones.
+    static Error osStatus(std::int32_t status);
+
+    const std::string& domain() const noexcept { return domain_; }
+    std::int64_t code() const noexcept { return code_; }
+
+    /// One sentence for a person, naming the file where there is one.
+    std::string localizedDescription() const;
+
+    /// The bare reason, without what it concerns.
+    const std::string& localizedFailureReason() const noexcept { return text_; }
+
+    const Dictionary& userInfo() const noexcept { return userInfo_; }
+
+    /// The same error with one more entry of user information.
+    Error with(std::string_view key, Value value) &&;
+
+    bool operator==(const Error&) const = default;
+
+  private:
+    std::string domain_;
+    std::int64_t code_;
+    std::string text_;
+    Dictionary userInfo_;
+};
+
+/// Either a value or the error that kept it from being made.
+template <class T>
+class [[nodiscard]] Result {
+  public:
+    Result(T value) : content_(std::in_place_index<0>, std::move(value)) {}      // NOLINT: implicit by design
+    Result(Error error) : content_(std::in_place_index<1>, std::move(error)) {}  // NOLINT: implicit by design
+
+    bool has_value() const noexcept { return content_.index() == 0; }
+    explicit operator bool() const noexcept { return has_value(); }
+
+    /// Undefined unless has_value().
+    T& operator*() & { return *std::get_if<0>(&content_); }
+    const T& operator*() const& { return *std::get_if<0>(&content_); }
+    T&& operator*() && { return std::move(*std::get_if<0>(&content_)); }
+    T* operator->() { return std::get_if<0>(&content_); }
+    const T* operator->() const { return std::get_if<0>(&content_); }
+
+    /// Undefined if has_value().
+    const Error& error() const { return *std::get_if<1>(&content_); }
+
+    std::optional<T> asOptional() && {
+        if (has_value()) return std::move(*std::get_if<0>(&content_));
+        return std::nullopt;
+    }
+
+  private:
+    std::variant<T, Error> content_;
+};
+
+/// Success, or an error.
+template <>
+class [[nodiscard]] Result<void> {
+  public:
+    Result() = default;
+    Result(Error error) : error_(std::move(error)) {}  // NOLINT: implicit by design
+
+    bool has_value() const noexcept { return !error_.has_value(); }
+    explicit operator bool() const noexcept { return has_value(); }
+    const Error& error() const { return *error_; }
+
+  private:
+    std::optional<Error> error_;
+};
+
+}  // namespace pinwell::foundation

@@ -1,0 +1,148 @@
+// Printf-style formats with objects, checked against their arguments when compiling.
+//
+//   format("Found %lu blobs in %@", count, url)
+//
+// Conversions: %@ (any Describable), %d %i (integers of at most 32 bits, printed as signed), %u %x %X %o (the
+// same, as unsigned), the l, ll, z, t and j lengths (64-bit integers), hh (one byte), %c (one character), %s
+// (text; control characters escaped), %%. Flags, width and precision as in printf, but no '*'.
+// A format that does not fit its arguments does not compile.
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <span>
+#include <string>
+#include <string_view>
+#include <type_traits>
+
+#include "foundation/description.h"
+
+namespace pinwell::foundation {
+namespace format_detail {
+
+enum class ArgumentKind { object, int8, int32, int64, text };
+
+/// One conversion of a format: from '%' to its letter.
+struct Conversion {
+    std::size_t end = 0;  // index just behind the letter
+    char letter = '\0';
+    ArgumentKind wants = ArgumentKind::object;
+};
+
+struct MalformedFormat {};
+
+constexpr bool isOneOf(char c, std::string_view set) { return set.find(c) != std::string_view::npos; }
+
+/// Reads the conversion that begins at format[start] == '%'. Throws MalformedFormat; in a constant expression
+/// that stops the compiler.
+constexpr Conversion scanConversion(std::string_view format, std::size_t start) {
+    std::size_t at = start + 1;
+    const auto peek = [&] { return at < format.size() ? format[at] : '\0'; };
+    while (peek() != '\0' && isOneOf(peek(), "-+ #0")) ++at;
+    while (peek() >= '0' && peek() <= '9') ++at;
+    if (peek() == '.') {
+        ++at;
+        while (peek() >= '0' && peek() <= '9') ++at;
+    }
+    ArgumentKind integer = ArgumentKind::int32;
+    if (format.substr(at).starts_with("hh")) {
+        integer = ArgumentKind::int8;
+        at += 2;
+    } else if (format.substr(at).starts_with("ll")) {
+        integer = ArgumentKind::int64;
+        at += 2;
+    } else if (peek() != '\0' && isOneOf(peek(), "lztj")) {
+        integer = ArgumentKind::int64;
+        at += 1;
+    }
+    const char letter = peek();
+    Conversion conversion{at + 1, letter, integer};
+    switch (letter) {
+        case 'd': case 'i': case 'u': case 'x': case 'X': case 'o': break;
+        case 'c': conversion.wants = ArgumentKind::int8; break;
+        case 's': conversion.wants = ArgumentKind::text; break;
+        case '@': case '%': conversion.wants = ArgumentKind::object; break;
+        default: throw MalformedFormat{};
+    }
+    return conversion;
+}
+
+template <class T>
+constexpr bool fits(ArgumentKind wants) {
+    using U = std::remove_cvref_t<std::decay_t<T>>;
+    switch (wants) {
+        case ArgumentKind::object: return Describable<U>;
+        case ArgumentKind::int8: return std::is_integral_v<U> && sizeof(U) == 1;
+        case ArgumentKind::int32: return std::is_integral_v<U> && sizeof(U) <= 4;
+        case ArgumentKind::int64: return std::is_integral_v<U> && sizeof(U) == 8;
+        case ArgumentKind::text: return std::is_convertible_v<const U&, std::string_view>;
+    }
+    return false;
+}
+
+/// An argument on its way to the formatter: an integer, or the text of an object.
+struct Argument {
+    std::uint64_t integer = 0;  // sign-extended when the argument was signed
+    std::string text;
+};
+
+template <class T>
+Argument makeArgument(const T& value) {
+    using U = std::remove_cvref_t<std::decay_t<T>>;
+    if constexpr (std::is_integral_v<U>) {
+        return {static_cast<std::uint64_t>(value), {}};
+    } else if constexpr (Describable<U>) {
+        return {0, Description<U>::of(value)};
+    } else {
+        static_assert(std::is_convertible_v<const U&, std::string_view>);
+        return {0, escapeForTerminal(std::string_view(value))};
+    }
+}
+
+std::string formatArguments(std::string_view format, std::span<const Argument> arguments);
+
+}  // namespace format_detail
+
+/// A format that was checked against `Args`. Made from a string literal only.
+template <class... Args>
+class FormatString {
+  public:
+    template <std::size_t N>
+    consteval FormatString(const char (&literal)[N]) : text_(literal, N - 1) {  // NOLINT: implicit by design
+        std::size_t next = 0;
+        for (std::size_t at = 0; at < text_.size();) {
+            if (text_[at] != '%') {
+                ++at;
+                continue;
+            }
+            const auto conversion = format_detail::scanConversion(text_, at);
+            if (conversion.letter != '%') {
+                if (!argumentFits(next, conversion.wants)) throw format_detail::MalformedFormat{};
+                ++next;
+            }
+            at = conversion.end;
+        }
+        if (next != sizeof...(Args)) throw format_detail::MalformedFormat{};
+    }
+
+    constexpr std::string_view text() const noexcept { return text_; }
+
+  private:
+    static consteval bool argumentFits(std::size_t index, format_detail::ArgumentKind wants) {
+        const std::array<bool, sizeof...(Args) + 1> fitting{format_detail::fits<Args>(wants)..., false};
+        return index < sizeof...(Args) && fitting[index];
+    }
+
+    std::string_view text_;
+};
+
+/// The formatted text.
+template <class... Args>
+std::string format(FormatString<std::type_identity_t<Args>...> format, const Args&... args) {
+    const std::array<format_detail::Argument, sizeof...(Args) + 1> arguments{
+        format_detail::makeArgument(args)..., format_detail::Argument{}};
+    return format_detail::formatArguments(format.text(), std::span(arguments).first(sizeof...(Args)));
+}
+
+}  // namespace pinwell::foundation

@@ -1,0 +1,20 @@
+// JSON (RFC 8259) in and out.
+#pragma once
+
+#include "foundation/error.h"
+
+namespace pinwell::foundation {
+
+/// Deepest nesting of arrays and objects that is read.
+inline constexpr unsigned kMaximumJSONDepth = 512;
+
+/// The document, whose top level must be an object or an array. UTF-8, one leading byte-order mark allowed,
+/// nothing but white space behind it. The last of several equal keys wins. An integer that fits 64 bits stays an
+/// integer. The error (kDataErrorDomain) names the byte position.
+Result<Value> parseJSON(ByteView document);
+
+/// Without pretty-printing; keys in sorted order. Fails for what JSON cannot say: nil, byte buffers, dates, URLs,
+/// errors, a number that is not finite, text that is not UTF-8, a top level that is no object or array.
+Result<Data> serializeJSON(const Value& value);
+
+}  // namespace pinwell::foundation

@@ -1,0 +1,43 @@
+// The one directory that describes the platform a run trusts: its record service, its root certificates, the
+// user's own trust settings, and the build variant.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "foundation/error.h"
+
+namespace pinwell::foundation {
+
+/// Where things are below the platform directory. A directory or file that does not exist is the same as an empty
+/// one. Immutable; may be used from any thread. Nothing is read until it is asked for.
+class PlatformDirectory {
+  public:
+    explicit PlatformDirectory(std::string path) : path_(std::move(path)) {}
+
+    /// $PINWELL_PLATFORM when it is set (and the process runs with no more rights than its caller), else the
+    /// installed system's own.
+    static PlatformDirectory current();
+
+    const std::string& path() const noexcept { return path_; }
+
+    /// The record service's API host, "HOST" or "HOST:PORT", from platform.json; the built-in default when the
+    /// file or the entry is absent. The error names the file and, for a syntax error, the position.
+    Result<std::string> lumoraHost() const;
+
+    /// Regular files named *.pem (links followed) in one of the certificate directories, in byte order.
+    std::vector<std::string> rootCertificateFiles() const { return pemFiles("roots"); }
+    std::vector<std::string> compatibilityRootCertificateFiles() const { return pemFiles("compat-roots"); }
+    std::vector<std::string> userAllowedCertificateFiles() const { return pemFiles("user-trust/allow"); }
+    std::vector<std::string> userDeniedCertificateFiles() const { return pemFiles("user-trust/deny"); }
+
+    /// Whether the build variant allows internal security policies.
+    bool allowsInternalSecurityPolicies() const;
+
+  private:
+    std::vector<std::string> pemFiles(std::string_view directory) const;
+
+    std::string path_;
+};
+
+}  // namespace pinwell::foundation

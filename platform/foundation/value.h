@@ -1,0 +1,99 @@
+// Dynamically typed values: what JSON, property lists, user defaults and resource properties hold.
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <memory>
+#include <stdexcept>
+#include <string>
+#include <string_view>
+#include <variant>
+#include <vector>
+
+#include "foundation/bytes.h"
+#include "foundation/date.h"
+#include "foundation/url.h"
+
+namespace pinwell::foundation {
+
+class Error;
+class Value;
+
+using Array = std::vector<Value>;
+using Dictionary = std::map<std::string, Value, std::less<>>;
+
+/// A value was asked for something its kind does not have (an element of a string, say).
+class ValueTypeError : public std::runtime_error {
+  public:
+    using std::runtime_error::runtime_error;
+};
+
+/// Nil, a JSON null, or one immutable value. Containers are shared, never copied.
+///
+/// The subscripts follow the platform's objects: a question put to nil is answered with nil, a key that a
+/// dictionary does not hold is nil, and a question that the kind cannot answer is an error (ValueTypeError;
+/// std::out_of_range for an index past the end).
+class Value {
+  public:
+    struct Null {
+        bool operator==(const Null&) const = default;
+    };
+
+    Value() = default;
+    Value(std::nullptr_t) {}
+    Value(Null) : content_(Null{}) {}
+    Value(bool value) : content_(value) {}
+    Value(std::int64_t value) : content_(value) {}
+    Value(std::uint64_t value) : content_(value) {}
+    Value(int value) : content_(std::int64_t{value}) {}
+    Value(unsigned value) : content_(std::uint64_t{value}) {}
+    Value(double value) : content_(value) {}
+    Value(std::string value) : content_(std::move(value)) {}
+    Value(std::string_view value) : content_(std::string(value)) {}
+    Value(const char* value) : content_(std::string(value)) {}
+    Value(Data value) : content_(std::make_shared<const Data>(std::move(value))) {}
+    Value(Date value) : content_(value) {}
+    Value(URL value) : content_(std::make_shared<const URL>(std::move(value))) {}
+    Value(Error value);
+    Value(Array value);
+    Value(Dictionary value);
+    template <class T>
+    Value(const T*) = delete;  // a pointer would silently become true
+
+    bool isNil() const noexcept { return std::holds_alternative<std::monostate>(content_); }
+    bool isNull() const noexcept { return std::holds_alternative<Null>(content_); }
+    bool isNumber() const noexcept;  // bool included, as on the platform
+
+    /// Null unless the value is of that kind.
+    const std::string* string() const noexcept { return std::get_if<std::string>(&content_); }
+    const Data* data() const noexcept;
+    const Date* date() const noexcept { return std::get_if<Date>(&content_); }
+    const URL* url() const noexcept;
+    const Error* error() const noexcept;
+    const Array* array() const noexcept;
+    const Dictionary* dictionary() const noexcept;
+    const bool* boolean() const noexcept { return std::get_if<bool>(&content_); }
+
+    /// The number as an unsigned word: negative integers wrap, fractions are cut, what does not fit saturates;
+    /// 0 for whatever is not a number.
+    std::uint64_t unsignedIntegerValue() const noexcept;
+
+    /// Whether the number is not zero; false for whatever is not a number.
+    bool boolValue() const noexcept;
+
+    const Value& operator[](std::string_view key) const;
+    const Value& operator[](std::size_t index) const;
+
+    /// As the kind's description, see description.h. For use inside descriptions.
+    std::string describe(unsigned indent) const;
+
+    bool operator==(const Value& other) const;
+
+  private:
+    std::variant<std::monostate, Null, bool, std::int64_t, std::uint64_t, double, std::string, Date,
+                 std::shared_ptr<const Data>, std::shared_ptr<const URL>, std::shared_ptr<const Error>,
+                 std::shared_ptr<const Array>, std::shared_ptr<const Dictionary>>
+        content_;
+};
+
+}  // namespace pinwell::foundation

@@ -1,0 +1,164 @@
+// HTTPS sessions: data and download tasks whose server trust the delegate decides.
+//
+// A session is ephemeral: nothing of it outlives the process, no cookies, cache or credentials are kept. It owns a
+// serial callback queue; the delegate's methods and the completion handlers run there, one at a time, never on the
+// thread that started the task. A session must not be destroyed from its own queue.
+#pragma once
+
+#include <functional>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "foundation/description.h"
+#include "foundation/serial_queue.h"
+#include "trust/trust.h"
+
+namespace pinwell::https {
+
+using foundation::Data;
+using foundation::Error;
+using foundation::URL;
+
+inline constexpr int kMaximumRedirects = 10;
+inline constexpr long kIdleTimeoutSeconds = 60;
+inline constexpr std::size_t kMaximumResponseBody = 64ULL * 1024 * 1024;  // of a data task
+inline constexpr std::size_t kMaximumDownload = 64ULL * 1024 * 1024;
+inline constexpr std::string_view kUserAgent = "pinwell/34.0";
+
+/// Codes of kURLErrorDomain.
+enum class URLErrorCode : std::int64_t {
+    cancelled = 1,        // the challenge was cancelled: the server is not trusted
+    unsupportedURL = 2,   // no URL, not https, or a redirect to what is not
+    cannotFindHost = 3,
+    cannotConnect = 4,
+    timedOut = 5,
+    tooManyRedirects = 6,
+    tooLarge = 7,
+    secureConnectionFailed = 8,
+    badServerResponse = 9,
+    connectionLost = 10,
+    proxyFailed = 11,
+    cannotWriteFile = 12,
+    invalidConfiguration = 13,
+    unknown = 99,
+};
+
+/// Header names compare without regard to case; the first spelling is kept.
+struct CaseInsensitiveLess {
+    bool operator()(std::string_view a, std::string_view b) const noexcept;
+    using is_transparent = void;
+};
+using Headers = std::map<std::string, std::string, CaseInsensitiveLess>;
+
+/// A request to be made. Without a URL it does not start.
+struct Request {
+    std::optional<URL> url;
+    std::string method = "GET";
+    Data body;
+    Headers headers;
+
+    void addHeader(std::string_view name, std::string_view value);
+};
+
+/// What came back before the body. Of a redirect chain, the last one's.
+struct HTTPResponse {
+    URL url;
+    int status = 0;
+    Headers headers;
+
+    /// Nothing when the response does not have it.
+    std::optional<std::string> header(std::string_view name) const;
+};
+
+/// The platform's text for a status code: "not found" for 404.
+std::string localizedStringForStatusCode(int status);
+
+/// How the server is to be judged.
+enum class AuthenticationMethod { serverTrust, clientCertificate, password };
+
+/// A question that the connection puts to the delegate.
+struct AuthenticationChallenge {
+    std::string host;  // as named in the URL being fetched, without port or brackets
+    AuthenticationMethod method = AuthenticationMethod::serverTrust;
+    std::shared_ptr<trust::Trust> serverTrust;  // set for the serverTrust method
+};
+
+enum class Disposition { useCredential = 0, performDefaultHandling = 1, cancelChallenge = 2 };
+
+/// Permission to go on with the server that was judged.
+struct Credential {
+    std::shared_ptr<trust::Trust> trust;
+};
+
+using ChallengeCompletion = std::function<void(Disposition, std::optional<Credential>)>;
+
+class Session;
+class Task;
+
+/// Callbacks of a session, on its queue.
+class SessionDelegate {
+  public:
+    virtual ~SessionDelegate() = default;
+
+    /// Must call `completion` exactly once, before it returns. Default handling of a server-trust challenge, or a
+    /// credential for another trust object, refuses the server.
+    virtual void didReceiveChallenge(Session& session, const AuthenticationChallenge& challenge,
+                                     const ChallengeCompletion& completion) = 0;
+
+    /// The body of a download task is in the file at `location` (mode 0600, in the temporary directory), which is
+    /// removed when this returns.
+    virtual void didFinishDownloading(Session& session, Task& task, const URL& location) = 0;
+
+    /// A download task has ended; without an error, didFinishDownloading has run before.
+    virtual void didComplete(Session& session, Task& task, const std::optional<Error>& error) = 0;
+};
+
+enum class TaskState { running = 0, suspended = 1, canceling = 2, completed = 3 };
+
+/// One exchange. Made suspended. May be used from any thread.
+class Task {
+  public:
+    virtual ~Task() = default;
+
+    /// Starts it. A task whose request has no URL does not start: the state stays what it is not running, the
+    /// completion is not called.
+    virtual void resume() = 0;
+    virtual TaskState state() const = 0;
+    virtual std::optional<HTTPResponse> response() const = 0;
+};
+
+/// Body, response and error of a data task, each may be missing.
+using DataCompletion =
+    std::function<void(const std::optional<Data>&, const std::optional<HTTPResponse>&, const std::optional<Error>&)>;
+
+class Session {
+  public:
+    virtual ~Session() = default;
+    virtual std::shared_ptr<Task> dataTask(Request request, DataCompletion completion) = 0;
+    virtual std::shared_ptr<Task> downloadTask(Request request) = 0;
+};
+
+class SessionService {
+  public:
+    virtual ~SessionService() = default;
+
+    /// The delegate must outlive the session.
+    virtual std::shared_ptr<Session> ephemeralSession(SessionDelegate& delegate) = 0;
+};
+
+/// Sessions over the network. The trust service must outlive them.
+std::unique_ptr<SessionService> makeSessionService(trust::TrustService& trust);
+
+}  // namespace pinwell::https
+
+namespace pinwell::foundation {
+
+/// <HTTPResponse: 0x...>-free and stable: { URL: ... } { Status Code: 200, Headers { ... } }
+template <>
+struct Description<https::HTTPResponse> {
+    static std::string of(const https::HTTPResponse& response);
+};
+
+}  // namespace pinwell::foundation

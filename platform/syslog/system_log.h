@@ -1,0 +1,30 @@
+// The system log.
+#pragma once
+
+#include <memory>
+#include <string_view>
+
+#include "foundation/format.h"
+
+namespace pinwell::syslog {
+
+/// Where error entries go. May be used from any thread.
+class SystemLog {
+  public:
+    virtual ~SystemLog() = default;
+
+    /// One entry at error level; the text has its control characters escaped already.
+    virtual void error(std::string_view text) = 0;
+
+    template <class... Args>
+    void error(foundation::FormatString<std::type_identity_t<Args>...> format, const Args&... args)
+        requires(sizeof...(Args) > 0)
+    {
+        error(std::string_view(foundation::format(format, args...)));
+    }
+};
+
+/// syslog(3), facility user, identity "pinwell". Opened on first use.
+std::unique_ptr<SystemLog> makeSystemLog();
+
+}  // namespace pinwell::syslog

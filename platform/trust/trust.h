@@ -1,0 +1,157 @@
+// The certificate-trust service: certificates, policies that are lists of options, trust objects and their verdict.
+//
+// A policy is its options and nothing more: what the list does not name is not checked. All calls block and may be
+// made from any thread; one trust object serves one thread at a time.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "foundation/bytes.h"
+#include "foundation/date.h"
+#include "foundation/error.h"
+#include "foundation/platform_directory.h"
+
+namespace pinwell::trust {
+
+using foundation::Array;
+using foundation::ByteView;
+using foundation::Data;
+using foundation::Date;
+using foundation::Dictionary;
+using foundation::Error;
+
+/// A platform status; 0 is success.
+using Status = std::int32_t;
+inline constexpr Status kSuccess = 0;
+inline constexpr Status kParameterError = -50;
+
+/// Verdict numbers of an evaluation.
+enum class Verdict : std::uint32_t {
+    invalid = 0,             // not evaluated
+    proceed = 1,             // anchored only through certificates that the user chose to trust
+    deny = 3,                // the user distrusts a certificate of the chain
+    unspecified = 4,         // trusted by the platform's own anchors, without a user setting
+    recoverableFailure = 5,  // a policy check failed
+    fatalFailure = 6,        // bad signature, malformed, unhandled critical extension
+    otherError = 7,
+};
+
+/// One parsed X.509 certificate (RFC 5280). Immutable, shared.
+class Certificate {
+  public:
+    virtual ~Certificate() = default;
+
+    virtual const Data& der() const = 0;
+
+    /// What a person knows it by: the subject's common name, else its last named part, else its key identifier.
+    virtual std::string subjectSummary() const = 0;
+};
+using CertificateRef = std::shared_ptr<const Certificate>;
+
+/// A public key. Immutable, shared.
+class PublicKey {
+  public:
+    virtual ~PublicKey() = default;
+};
+using PublicKeyRef = std::shared_ptr<const PublicKey>;
+
+/// Option keys. The value's type stands behind each; `true` switches a check on.
+namespace option {
+inline constexpr std::string_view kCriticalExtensions = "CriticalExtensions";      // true
+inline constexpr std::string_view kIdLinkage = "IdLinkage";                        // true
+inline constexpr std::string_view kBasicConstraints = "BasicConstraints";          // true
+inline constexpr std::string_view kNonEmptySubject = "NonEmptySubject";            // true
+inline constexpr std::string_view kPlatformAnchor = "PlatformAnchor";              // dictionary of sub-options, may be empty
+inline constexpr std::string_view kCompatibilityAnchor = "CompatibilityAnchor";    // the same, compat-roots/ besides
+inline constexpr std::string_view kChainLength = "ChainLength";                    // number, leaf and root counted
+inline constexpr std::string_view kIntermediateMarkerOid = "IntermediateMarkerOid";  // dotted OID, or a list of them
+inline constexpr std::string_view kLeafMarkerOid = "LeafMarkerOid";                // dotted OID, or a list of them
+inline constexpr std::string_view kKeySize = "KeySize";                            // key type -> minimum bits
+inline constexpr std::string_view kValidityDates = "ValidityDates";                // true
+inline constexpr std::string_view kHostName = "HostName";                          // DNS name or IP address
+inline constexpr std::string_view kServerAuthentication = "ServerAuthentication";  // true
+}  // namespace option
+
+/// Key types, the keys of the kKeySize dictionary.
+inline constexpr std::string_view kKeyTypeRSA = "RSA";
+inline constexpr std::string_view kKeyTypeEllipticCurve = "EC";
+
+/// A certificate policy. The three fields are the whole of it.
+struct Policy {
+    std::string oid;
+    std::optional<std::string> name;
+    Dictionary options;
+};
+using PolicyRef = std::shared_ptr<const Policy>;
+
+/// Extension that marks the TLS leaf of the pinned policy.
+inline constexpr std::string_view kPinnedServerMarkerOid = "1.2.840.177245.100.6.27.2";
+
+/// The two TLS server policies, bound to a host; nothing for an empty host.
+PolicyRef createPinnedServerPolicy(std::string_view host);
+PolicyRef createCompatibilityServerPolicy(std::string_view host);
+
+/// Keys of the property dictionaries.
+inline constexpr std::string_view kPropertyTitle = "title";
+inline constexpr std::string_view kPropertyError = "error";
+
+/// A certificate list under evaluation.
+class Trust {
+  public:
+    virtual ~Trust() = default;
+
+    /// Replaces the policies by this one and forgets an earlier verdict.
+    virtual Status setPolicy(PolicyRef policy) = 0;
+
+    /// Judges the list. A status other than success means that no judgement was possible.
+    virtual Status evaluate(Verdict& verdict) = 0;
+
+    /// One dictionary per certificate of the chain, leaf first: a title, and an error where it is at fault.
+    virtual Array copyProperties() const = 0;
+
+    /// One line that names what failed and the certificate at fault; nothing after success.
+    virtual std::optional<std::string> copyFailureDescription() const = 0;
+
+    /// Of the evaluated leaf; null when there is none.
+    virtual PublicKeyRef copyPublicKey() const = 0;
+};
+
+/// A policy library that could be opened, and what it says under a name.
+enum class NamedPolicyOutcome {
+    unavailable,  // no library, or it does not know the name
+    refused,      // the constructor returned nothing
+    created,
+};
+
+class TrustService {
+  public:
+    virtual ~TrustService() = default;
+
+    /// Null when `der` is not exactly one well-formed certificate.
+    virtual CertificateRef createCertificate(ByteView der) = 0;
+
+    /// A policy from the platform security library's argument-less constructor of that name.
+    virtual NamedPolicyOutcome createNamedPolicy(const std::string& constructorName, PolicyRef& policy) = 0;
+
+    /// Leaf first. Certificates behind the leaf are candidates for its chain, in any number up to a named limit.
+    virtual Status createTrust(std::vector<CertificateRef> certificates, PolicyRef policy,
+                               std::shared_ptr<Trust>& trust) = 0;
+
+    /// ECDSA in X9.62 form over SHA-256 of `message`. The signature is the DER element at the front of `signature`;
+    /// whatever stands behind it must be zero. Nothing when it verifies.
+    virtual std::optional<Error> verifySignature(const PublicKey& key, ByteView message, ByteView signature) = 0;
+};
+
+/// The service over the platform directory's anchors, read once on first need. `now` is the evaluation time.
+/// A PEM file that cannot be read counts for nothing; `logError` is told once, with one line that names it.
+std::unique_ptr<TrustService> makeTrustService(foundation::PlatformDirectory directory,
+                                               std::function<void(std::string_view)> logError,
+                                               std::function<Date()> now = Date::now);
+
+}  // namespace pinwell::trust
