@@ -4,6 +4,8 @@
 
 #include <algorithm>
 
+#include "foundation/utf8.h"
+
 namespace pinwell::foundation {
 namespace {
 
@@ -13,36 +15,6 @@ constexpr std::size_t kExcerptHead = 16;
 constexpr std::size_t kExcerptTail = 4;
 
 constexpr unsigned kIndentStep = 4;
-
-// Length of the well-formed UTF-8 sequence (RFC 3629) at the front of `text`, or 0.
-std::size_t utf8SequenceLength(std::string_view text) {
-    const auto byte = [&](std::size_t i) { return static_cast<unsigned char>(text[i]); };
-    const unsigned char lead = byte(0);
-    if (lead < 0x80) return 1;
-    std::size_t length = 0;
-    unsigned char low = 0x80;
-    unsigned char high = 0xBF;
-    if (lead >= 0xC2 && lead <= 0xDF) {
-        length = 2;
-    } else if (lead >= 0xE0 && lead <= 0xEF) {
-        length = 3;
-        if (lead == 0xE0) low = 0xA0;
-        if (lead == 0xED) high = 0x9F;
-    } else if (lead >= 0xF0 && lead <= 0xF4) {
-        length = 4;
-        if (lead == 0xF0) low = 0x90;
-        if (lead == 0xF4) high = 0x8F;
-    } else {
-        return 0;
-    }
-    if (text.size() < length) return 0;
-    for (std::size_t i = 1; i < length; ++i) {
-        if (byte(i) < low || byte(i) > high) return 0;
-        low = 0x80;
-        high = 0xBF;
-    }
-    return length;
-}
 
 bool isControl(std::string_view sequence) {
     const auto first = static_cast<unsigned char>(sequence[0]);

@@ -19,6 +19,11 @@ inline constexpr std::string_view kOSStatusErrorDomain = "OSStatusErrorDomain"; 
 inline constexpr std::string_view kURLErrorDomain = "URLErrorDomain";            // https/session.h
 inline constexpr std::string_view kDataErrorDomain = "DataErrorDomain";          // malformed documents
 
+/// Codes of kDataErrorDomain.
+inline constexpr std::int64_t kMalformedDocument = 1;     // it does not follow its format
+inline constexpr std::int64_t kExcessiveDocument = 2;     // it exceeds a limit on length, nesting or values
+inline constexpr std::int64_t kUnrepresentableValue = 3;  // the format cannot say it
+
 /// User-information keys.
 inline constexpr std::string_view kFilePathKey = "FilePath";
 inline constexpr std::string_view kURLKey = "FailingURL";

@@ -73,6 +73,9 @@ class Value {
     const Array* array() const noexcept;
     const Dictionary* dictionary() const noexcept;
     const bool* boolean() const noexcept { return std::get_if<bool>(&content_); }
+    const std::int64_t* integer() const noexcept { return std::get_if<std::int64_t>(&content_); }
+    const std::uint64_t* unsignedInteger() const noexcept { return std::get_if<std::uint64_t>(&content_); }
+    const double* real() const noexcept { return std::get_if<double>(&content_); }
 
     /// The number as an unsigned word: negative integers wrap, fractions are cut, what does not fit saturates;
     /// 0 for whatever is not a number.

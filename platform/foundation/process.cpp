@@ -1,0 +1,57 @@
+#include "foundation/process.h"
+
+#include <fmt/format.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cstdlib>
+#include <system_error>
+
+#include "foundation/bytes.h"
+
+namespace pinwell::foundation {
+namespace {
+
+constexpr std::size_t kLongestSafeName = 200;
+
+}  // namespace
+
+std::string processName() { return program_invocation_short_name; }
+
+std::string globallyUniqueString() {
+    std::array<std::byte, 16> random{};
+    if (getentropy(random.data(), random.size()) != 0)
+        throw std::system_error(errno, std::generic_category(), "getentropy");
+    random[6] = (random[6] & std::byte{0x0F}) | std::byte{0x40};  // version 4
+    random[8] = (random[8] & std::byte{0x3F}) | std::byte{0x80};  // variant 10
+    std::string text;
+    for (std::size_t i = 0; i < random.size(); ++i) {
+        if (i == 4 || i == 6 || i == 8 || i == 10) text += '-';
+        text += fmt::format("{:02X}", std::to_integer<unsigned>(random[i]));
+    }
+    return text;
+}
+
+URL temporaryDirectory() {
+    const std::optional<std::string> path = secureEnvironment("TMPDIR");
+    return URL::fileURLWithPath(path && path->starts_with('/') ? *path : "/tmp");
+}
+
+std::optional<std::string> secureEnvironment(const char* name) {
+    const char* value = secure_getenv(name);
+    if (value == nullptr) return std::nullopt;
+    return value;
+}
+
+bool isSafeFileName(std::string_view identifier) {
+    if (identifier.empty() || identifier.size() > kLongestSafeName) return false;
+    if (identifier == "." || identifier == "..") return false;
+    return std::none_of(identifier.begin(), identifier.end(), [](char c) {
+        const auto byte = static_cast<unsigned char>(c);
+        return c == '/' || byte < 0x20 || byte == 0x7F;
+    });
+}
+
+}  // namespace pinwell::foundation

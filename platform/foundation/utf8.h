@@ -1,0 +1,14 @@
+// UTF-8 (RFC 3629), as strict as the RFC: no overlong forms, no surrogates, nothing above U+10FFFF.
+#pragma once
+
+#include <cstddef>
+#include <string_view>
+
+namespace pinwell::foundation {
+
+/// Length in bytes of the well-formed sequence at the front of `text`; 0 when there is none.
+std::size_t utf8SequenceLength(std::string_view text) noexcept;
+
+bool isUTF8(std::string_view text) noexcept;
+
+}  // namespace pinwell::foundation
