@@ -67,7 +67,8 @@ std::optional<std::string> executableBelow(const std::string& contents, const st
     std::filesystem::directory_iterator entry(contents, failure);
     for (; !failure && entry != std::filesystem::directory_iterator(); entry.increment(failure)) {
         const std::string& directory = entry->path().native();
-        if ((first && directory >= first->substr(0, first->rfind('/'))) || !isOwnEntry(directory, S_IFDIR)) continue;
+        if ((first && directory >= first->substr(0, first->rfind('/'))) || !isOwnEntry(directory, S_IFDIR))
+            continue;
         if (auto found = executableIn(directory, name)) first = std::move(found);
     }
     return first;
@@ -83,8 +84,8 @@ std::optional<std::string> mainExecutableOfBundle(const std::string& path) {
         return executableIn(version, executableName(information, path));
     }
     const std::string contents = path + "/Contents";
-    const Value information =
-        informationDictionary({contents + "/Info.plist", path + "/Resources/Info.plist", path + "/Info.plist"});
+    const Value information = informationDictionary(
+        {contents + "/Info.plist", path + "/Resources/Info.plist", path + "/Info.plist"});
     const std::string name = executableName(information, path);
     return isDirectory(contents) ? executableBelow(contents, name) : executableIn(path, name);
 }

@@ -10,7 +10,7 @@ namespace {
 
 struct Unit {
     std::string_view name;
-    unsigned shift;      // one of it is 2^shift bytes
+    unsigned shift;       // one of it is 2^shift bytes
     std::uint64_t scale;  // 10^fraction digits
 };
 

@@ -37,8 +37,9 @@ void FileDescriptor::reset() noexcept {
 
 Result<Data> readSmallFile(const std::string& path, std::size_t limit) {
     if (path.find('\0') != std::string::npos) return Error::posix(EINVAL, path);
-    // Asked before opening, since opening alone can have an effect on a device; asked again after, since the name
-    // may lead somewhere else by then. O_NONBLOCK keeps a FIFO that slips in between from blocking the open.
+    // Asked before opening, since opening alone can have an effect on a device; asked again after, since the
+    // name may lead somewhere else by then. O_NONBLOCK keeps a FIFO that slips in between from blocking the
+    // open.
     struct stat status {};
     if (::stat(path.c_str(), &status) != 0) return Error::posix(errno, path);
     if (const int reason = refusal(status)) return Error::posix(reason, path);

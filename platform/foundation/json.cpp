@@ -12,11 +12,15 @@ namespace {
 
 using Library = nlohmann::json;
 
-Error malformed(std::string text) { return {kDataErrorDomain, kMalformedDocument, std::move(text)}; }
-Error excessive(std::string text) { return {kDataErrorDomain, kExcessiveDocument, std::move(text)}; }
+Error malformed(std::string text) {
+    return {kDataErrorDomain, kMalformedDocument, std::move(text)};
+}
+Error excessive(std::string text) {
+    return {kDataErrorDomain, kExcessiveDocument, std::move(text)};
+}
 
-// Receives the library's events and builds the value on a stack of its own, so that a deep document costs heap in
-// proportion to its length, and no call stack. Returning false ends the parse.
+// Receives the library's events and builds the value on a stack of its own, so that a deep document costs
+// heap in proportion to its length, and no call stack. Returning false ends the parse.
 class Builder {
   public:
     bool null() { return add(Value::Null{}); }
@@ -41,7 +45,8 @@ class Builder {
 
     bool parse_error(std::size_t position, const std::string&, const nlohmann::detail::exception&) {
         // The library counts the byte that it stumbled over.
-        error_ = malformed(fmt::format("The JSON document is malformed at byte {}.", std::max<std::size_t>(position, 1) - 1));
+        error_ = malformed(fmt::format("The JSON document is malformed at byte {}.",
+                                       std::max<std::size_t>(position, 1) - 1));
         return false;
     }
 
@@ -62,7 +67,8 @@ class Builder {
 
     bool open(bool isObject) {
         if (open_.size() == kMaximumJSONDepth) {
-            error_ = excessive(fmt::format("The JSON document is nested deeper than {} levels.", kMaximumJSONDepth));
+            error_ = excessive(
+                fmt::format("The JSON document is nested deeper than {} levels.", kMaximumJSONDepth));
             return false;
         }
         open_.push_back({isObject, {}, {}, {}});
@@ -77,7 +83,8 @@ class Builder {
 
     bool add(Value value) {
         if (++count_ > kMaximumJSONValues) {
-            error_ = excessive(fmt::format("The JSON document holds more than {} values.", kMaximumJSONValues));
+            error_ =
+                excessive(fmt::format("The JSON document holds more than {} values.", kMaximumJSONValues));
             return false;
         }
         if (open_.empty()) {
@@ -143,11 +150,13 @@ Result<Value> parseJSON(ByteView document) {
 
 Result<Data> serializeJSON(const Value& value) {
     if (value.array() == nullptr && value.dictionary() == nullptr)
-        return Error(kDataErrorDomain, kUnrepresentableValue, "The top level of JSON must be an object or an array.");
+        return Error(kDataErrorDomain, kUnrepresentableValue,
+                     "The top level of JSON must be an object or an array.");
     try {
         return toData(std::string_view(toLibrary(value, 0).dump()));
     } catch (const Unserializable& reason) {
-        return Error(kDataErrorDomain, kUnrepresentableValue, fmt::format("JSON cannot hold {}.", reason.what));
+        return Error(kDataErrorDomain, kUnrepresentableValue,
+                     fmt::format("JSON cannot hold {}.", reason.what));
     } catch (const Library::type_error&) {
         return Error(kDataErrorDomain, kUnrepresentableValue, "JSON cannot hold text that is not UTF-8.");
     }

@@ -18,8 +18,12 @@ namespace {
 constexpr std::size_t kLongestHostName = 253;  // RFC 1035, section 2.3.4, as text
 constexpr std::size_t kLongestLabel = 63;
 
-bool isDigit(char c) { return c >= '0' && c <= '9'; }
-bool isLetterOrDigit(char c) { return isDigit(c) || (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z'); }
+bool isDigit(char c) {
+    return c >= '0' && c <= '9';
+}
+bool isLetterOrDigit(char c) {
+    return isDigit(c) || (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
+}
 
 bool isAddress(int family, std::string_view text) {
     in6_addr address{};  // the larger of the two
@@ -73,7 +77,9 @@ bool isRegularFile(const std::string& path) {
 }
 
 Result<std::string> hostFromSettings(const Value& settings) {
-    const auto wrong = [](std::string text) { return Error(kDataErrorDomain, kMalformedDocument, std::move(text)); };
+    const auto wrong = [](std::string text) {
+        return Error(kDataErrorDomain, kMalformedDocument, std::move(text));
+    };
     if (settings.dictionary() == nullptr) return wrong("The top level is not an object, at byte 0.");
     const Value& service = settings["lumora"];
     if (service.isNil()) return std::string(PINWELL_LUMORA_HOST);

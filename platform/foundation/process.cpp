@@ -18,7 +18,9 @@ constexpr std::size_t kLongestSafeName = 200;
 
 }  // namespace
 
-std::string processName() { return program_invocation_short_name; }
+std::string processName() {
+    return program_invocation_short_name;
+}
 
 std::string globallyUniqueString() {
     std::array<std::byte, 16> random{};

@@ -37,7 +37,8 @@ Value fromArray(plist_t node) {
     const Iterator iterator(raw);
     Array elements;
     plist_t child = nullptr;
-    while (plist_array_next_item(node, iterator.get(), &child), child != nullptr) elements.push_back(fromNode(child));
+    while (plist_array_next_item(node, iterator.get(), &child), child != nullptr)
+        elements.push_back(fromNode(child));
     return elements;
 }
 
@@ -92,11 +93,15 @@ Value fromNode(plist_t node) {
         }
         case PLIST_DATA: {
             const char* bytes = plist_get_data_ptr(node, &length);
-            return bytes == nullptr ? Data() : toData(std::string_view(bytes, static_cast<std::size_t>(length)));
+            return bytes == nullptr ? Data()
+                                    : toData(std::string_view(bytes, static_cast<std::size_t>(length)));
         }
-        case PLIST_ARRAY: return fromArray(node);
-        case PLIST_DICT: return fromDictionary(node);
-        default: return {};
+        case PLIST_ARRAY:
+            return fromArray(node);
+        case PLIST_DICT:
+            return fromDictionary(node);
+        default:
+            return {};
     }
 }
 
@@ -119,7 +124,8 @@ Node containerToNode(const Value& value, unsigned depth) {
     if (depth == kMaximumPropertyListDepth) throw Unserializable{"values nested this deep"};
     if (const Array* elements = value.array()) {
         Node array(plist_new_array());
-        for (const Value& element : *elements) plist_array_append_item(array.get(), toNode(element, depth + 1).release());
+        for (const Value& element : *elements)
+            plist_array_append_item(array.get(), toNode(element, depth + 1).release());
         return array;
     }
     Node dictionary(plist_new_dict());
@@ -130,7 +136,8 @@ Node containerToNode(const Value& value, unsigned depth) {
 
 Node toNode(const Value& value, unsigned depth) {
     if (const bool* flag = value.boolean()) return Node(plist_new_bool(*flag ? 1 : 0));
-    if (const auto* number = value.integer()) return Node(plist_new_uint(static_cast<std::uint64_t>(*number)));
+    if (const auto* number = value.integer())
+        return Node(plist_new_uint(static_cast<std::uint64_t>(*number)));
     if (const auto* number = value.unsignedInteger()) {
         if (!std::in_range<std::int64_t>(*number)) throw Unserializable{"an integer above 63 bits"};
         return Node(plist_new_uint(*number));
@@ -160,10 +167,13 @@ Result<Value> parsePropertyList(ByteView document) {
         return std::move(*refusal);
     plist_t raw = nullptr;
     const auto length = static_cast<std::uint32_t>(text.size());
-    if (isBinary) plist_from_bin(text.data(), length, &raw);
-    else plist_from_xml(text.data(), length, &raw);
+    if (isBinary)
+        plist_from_bin(text.data(), length, &raw);
+    else
+        plist_from_xml(text.data(), length, &raw);
     const Node root(raw);
-    if (root == nullptr) return Error(kDataErrorDomain, kMalformedDocument, "The property list is malformed.");
+    if (root == nullptr)
+        return Error(kDataErrorDomain, kMalformedDocument, "The property list is malformed.");
     return fromNode(root.get());
 }
 

@@ -66,7 +66,8 @@ class Guard {
 
     std::uint64_t sized(ByteReader& reader, unsigned width, std::string_view what) {
         std::uint64_t value = 0;
-        for (const std::byte byte : reader.bytes(width, what)) value = (value << 8U) | std::to_integer<unsigned>(byte);
+        for (const std::byte byte : reader.bytes(width, what))
+            value = (value << 8U) | std::to_integer<unsigned>(byte);
         return value;
     }
 
@@ -95,7 +96,8 @@ void Guard::readTrailer() {
         refuse(trailerOffset, "width out of range");
     if (tableOffset_ < kBinaryPropertyListMagic.size() || tableOffset_ > trailerOffset)
         refuse(trailerOffset, "offset table outside the list");
-    if (count > (trailerOffset - tableOffset_) / offsetWidth_) refuse(trailerOffset, "more objects than offsets");
+    if (count > (trailerOffset - tableOffset_) / offsetWidth_)
+        refuse(trailerOffset, "more objects than offsets");
     if (count > kMaximumPropertyListValues) refuseSize("holds too many objects");
     if (root_ >= count) refuse(trailerOffset, "no such root object");
     known_.resize(static_cast<std::size_t>(count));
@@ -145,7 +147,8 @@ void Guard::checkLeaf(ByteReader& reader, Kind kind, unsigned low) {
         case Kind::uid:
             if (low > 7) refuse(at, "identifier of more than 64 bits");
             return reader.skip(low + 1, "identifier");
-        default: refuse(at, "unknown kind of object");
+        default:
+            refuse(at, "unknown kind of object");
     }
 }
 

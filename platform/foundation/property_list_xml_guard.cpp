@@ -35,14 +35,20 @@ class Guard {
 
     void check() {
         if (document_.starts_with(kByteOrderMark)) at_ = kByteOrderMark.size();
-        if (const std::size_t zero = document_.find('\0'); zero != std::string_view::npos) refuse(zero, "zero byte");
+        if (const std::size_t zero = document_.find('\0'); zero != std::string_view::npos)
+            refuse(zero, "zero byte");
         while (nextMarkup()) {
             const std::string_view rest = document_.substr(at_);
-            if (rest.starts_with("<?")) skipPast("?>", 2);
-            else if (rest.starts_with("<!--")) skipPast("-->", 4);
-            else if (rest.starts_with("<![CDATA[")) markedSection();
-            else if (rest.starts_with("<!")) documentType();
-            else tag();
+            if (rest.starts_with("<?"))
+                skipPast("?>", 2);
+            else if (rest.starts_with("<!--"))
+                skipPast("-->", 4);
+            else if (rest.starts_with("<![CDATA["))
+                markedSection();
+            else if (rest.starts_with("<!"))
+                documentType();
+            else
+                tag();
         }
         if (!open_.empty()) refuse(document_.size(), "an element is not closed");
         if (values_ == 0) refuse(document_.size(), "no value");
@@ -50,7 +56,8 @@ class Guard {
 
   private:
     [[noreturn]] static void refuse(std::size_t offset, std::string_view what) {
-        throw Refusal{kMalformedDocument, fmt::format("The property list is malformed at byte {}: {}.", offset, what)};
+        throw Refusal{kMalformedDocument,
+                      fmt::format("The property list is malformed at byte {}: {}.", offset, what)};
     }
 
     bool inLeaf() const { return !open_.empty() && contains(kLeaves, open_.back()); }
@@ -79,12 +86,14 @@ class Guard {
 
     void documentType() {
         const std::string_view rest = document_.substr(at_);
-        if (!rest.starts_with("<!DOCTYPE") || !open_.empty() || values_ != 0) refuse(at_, "unknown declaration");
+        if (!rest.starts_with("<!DOCTYPE") || !open_.empty() || values_ != 0)
+            refuse(at_, "unknown declaration");
         const std::string_view declaration = rest.substr(0, rest.find('>'));
         if (declaration.size() == rest.size()) refuse(at_, "markup is not closed");
         if (declaration.find_first_of("[]") != std::string_view::npos)
             refuse(at_, "document type with an internal subset");
-        if (std::count(declaration.begin(), declaration.end(), '"') % 2 != 0) refuse(at_, "quoted angle bracket");
+        if (std::count(declaration.begin(), declaration.end(), '"') % 2 != 0)
+            refuse(at_, "quoted angle bracket");
         at_ += declaration.size() + 1;
     }
 
@@ -92,10 +101,13 @@ class Guard {
         const std::size_t end = document_.find('>', at_);
         if (end == std::string_view::npos) refuse(at_, "markup is not closed");
         std::string_view inside = document_.substr(at_ + 1, end - at_ - 1);
-        if (inside.find('<') != std::string_view::npos || std::count(inside.begin(), inside.end(), '"') % 2 != 0)
+        if (inside.find('<') != std::string_view::npos ||
+            std::count(inside.begin(), inside.end(), '"') % 2 != 0)
             refuse(at_, "quoted angle bracket");
-        if (inside.starts_with('/')) closeElement(inside.substr(1));
-        else openElement(inside);
+        if (inside.starts_with('/'))
+            closeElement(inside.substr(1));
+        else
+            openElement(inside);
         at_ = end + 1;
     }
 
