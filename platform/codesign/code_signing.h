@@ -1,6 +1,7 @@
 // The code-signing service: static code, its validity, and what its signature says.
 //
-// All calls block, read the file, and may be made from any thread; one code object serves one thread at a time.
+// All calls block, read the file, and may be made from any thread; one code object serves one thread at a
+// time.
 #pragma once
 
 #include <cstdint>
@@ -67,9 +68,10 @@ class CodeSigningService {
     virtual ~CodeSigningService() = default;
 
     /// A reference to the code at `path`: a bundle's main executable, a bundle's separate signature files, an
-    /// executable image (thin, or the preferred slice of a universal one) or a disk image. Only finds it; what the
-    /// signature is worth is asked with checkValidity.
-    virtual Status createStaticCode(const URL& path, std::uint32_t flags, std::shared_ptr<StaticCode>& code) = 0;
+    /// executable image (thin, or the preferred slice of a universal one) or a disk image. Only finds it;
+    /// what the signature is worth is asked with checkValidity.
+    virtual Status createStaticCode(const URL& path, std::uint32_t flags,
+                                    std::shared_ptr<StaticCode>& code) = 0;
 
     /// Static validity as this platform asks for it: structure, component digests and the CMS signature.
     /// Page hashes and sealed resources are not checked (both "do not validate" flags must be given).
@@ -78,8 +80,8 @@ class CodeSigningService {
     virtual Status copySigningInformation(StaticCode& code, std::uint32_t sets,
                                           std::optional<SigningInformation>& information) = 0;
 
-    /// Every code hash that the artefact at `path` is known by: the cdhashes of all code directories of all signed
-    /// slices, and of the signed code nested in a bundle. For a service that issues tickets.
+    /// Every code hash that the artefact at `path` is known by: the cdhashes of all code directories of all
+    /// signed slices, and of the signed code nested in a bundle. For a service that issues tickets.
     virtual Status copyAllCodeHashes(const URL& path, std::vector<SigningInformation>& all) = 0;
 };
 

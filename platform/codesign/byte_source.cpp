@@ -1,0 +1,67 @@
+#include "codesign/byte_source.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+
+#include "codesign/code_error.h"
+
+namespace pinwell::codesign {
+
+namespace {
+
+Status statusForOpen(int number) {
+    switch (number) {
+        case ENOENT:
+        case ENOTDIR:
+        case ELOOP:  // O_NOFOLLOW met a link
+        case ENXIO:  // a socket, or a pipe nobody writes to
+            return kStaticCodeNotFound;
+        default:
+            return kIOError;
+    }
+}
+
+}  // namespace
+
+Data ByteSource::read(std::uint64_t offset, std::size_t length) const {
+    if (offset > size() || length > size() - offset) refuse("a range reaches past the end of the file");
+    Data bytes(length);
+    if (readAt(offset, bytes) != length) throw CodeError(kIOError, "the file became shorter");
+    return bytes;
+}
+
+FileSource::FileSource(const std::string& path) {
+    file_ = foundation::FileDescriptor(
+        open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
+    if (!file_) throw CodeError(statusForOpen(errno), "cannot open the file");
+    struct stat status = {};
+    if (fstat(file_.get(), &status) != 0) throw CodeError(kIOError, "cannot examine the file");
+    if (!S_ISREG(status.st_mode)) throw CodeError(kStaticCodeNotFound, "not a regular file");
+    size_ = static_cast<std::uint64_t>(status.st_size);
+}
+
+std::size_t FileSource::readAt(std::uint64_t offset, std::span<std::byte> buffer) const {
+    std::size_t done = 0;
+    while (done < buffer.size()) {
+        const ssize_t count =
+            pread(file_.get(), buffer.data() + done, buffer.size() - done, static_cast<off_t>(offset + done));
+        if (count < 0 && errno == EINTR) continue;
+        if (count < 0) throw CodeError(kIOError, "cannot read the file");
+        if (count == 0) break;
+        done += static_cast<std::size_t>(count);
+    }
+    return done;
+}
+
+std::size_t MemorySource::readAt(std::uint64_t offset, std::span<std::byte> buffer) const {
+    const ByteView rest = ByteView(bytes_).subspan(static_cast<std::size_t>(offset));
+    const std::size_t count = std::min(rest.size(), buffer.size());
+    std::copy_n(rest.begin(), count, buffer.begin());
+    return count;
+}
+
+}  // namespace pinwell::codesign

@@ -1,0 +1,63 @@
+// Random access to the bytes of an artefact, without ever holding all of them.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string>
+
+#include "foundation/bytes.h"
+#include "foundation/file_io.h"
+
+namespace pinwell::codesign {
+
+using foundation::ByteView;
+using foundation::Data;
+
+/// Bytes with a size that was fixed when the source was made. A file may change afterwards; a read that no
+/// longer finds its bytes then fails, and nothing else happens.
+class ByteSource {
+  public:
+    virtual ~ByteSource() = default;
+
+    virtual std::uint64_t size() const = 0;
+
+    /// Exactly `length` bytes from `offset`. Throws CodeError: kInvalidSignature when the range does not lie
+    /// within size(), kIOError when the bytes cannot be read. Callers hold `length` against a named maximum
+    /// first.
+    Data read(std::uint64_t offset, std::size_t length) const;
+
+  protected:
+    /// Fills as much of `buffer` as there are bytes at `offset` and answers how much that was.
+    virtual std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const = 0;
+};
+
+/// A regular file, held open: a path that is replaced later does not matter any more.
+class FileSource final : public ByteSource {
+  public:
+    /// Never follows a link in the last component and never blocks on a pipe or device. Throws CodeError:
+    /// kStaticCodeNotFound when no regular file is there, kIOError when it cannot be opened.
+    explicit FileSource(const std::string& path);
+
+    std::uint64_t size() const override { return size_; }
+
+  private:
+    std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const override;
+
+    foundation::FileDescriptor file_;
+    std::uint64_t size_ = 0;
+};
+
+/// Bytes in memory, which the source owns.
+class MemorySource final : public ByteSource {
+  public:
+    explicit MemorySource(Data bytes) : bytes_(std::move(bytes)) {}
+
+    std::uint64_t size() const override { return bytes_.size(); }
+
+  private:
+    std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const override;
+
+    Data bytes_;
+};
+
+}  // namespace pinwell::codesign

@@ -1,0 +1,95 @@
+// The code directory: what a signature says about one piece of code, in one digest type. All integers are
+// big-endian; offsets count from its start.
+//
+// | Offset | Size | Field                                   | From version |
+// |--------|------|-----------------------------------------|--------------|
+// | 0      | 4    | magic FADE0C02                          |              |
+// | 4      | 4    | length of the whole                     |              |
+// | 8      | 4    | version, 0x20001 to 0x2FFFF             |              |
+// | 12     | 4    | flags                                   |              |
+// | 16     | 4    | hash offset: the digest of code slot 0  |              |
+// | 20     | 4    | identifier offset, a zero-ended string  |              |
+// | 24     | 4    | special slots                           |              |
+// | 28     | 4    | code slots                              |              |
+// | 32     | 4    | limit of the signed code                |              |
+// | 36     | 1    | digest size                             |              |
+// | 37     | 1    | digest type                             |              |
+// | 38     | 1    | platform                                |              |
+// | 39     | 1    | page size, as a power of two            |              |
+// | 40     | 4    | spare                                   |              |
+// | 44     | 4    | scatter offset, 0: none                 | 0x20100      |
+// | 48     | 4    | team offset, 0: none                    | 0x20200      |
+// | 52     | 4    | spare                                   | 0x20300      |
+// | 56     | 8    | limit of the signed code, 0: see 32     | 0x20300      |
+// | 64     | 24   | executable segment: base, limit, flags  | 0x20400      |
+// | 88     | 4    | runtime                                 | 0x20500      |
+// | 92     | 4    | pre-encryption hash offset, 0: none     | 0x20500      |
+//
+// The digest of special slot n stands n digests before the hash offset, those of the code slots from it on. A
+// scatter vector is a list of 24-byte records, ended by one whose count (its first four bytes) is zero.
+// Refused: whatever an offset or a count leads to that does not lie wholly behind the header and inside the
+// blob, a string without its end, a digest size that is not its type's, another version.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+
+#include "codesign/digest.h"
+
+namespace pinwell::codesign {
+
+inline constexpr std::uint32_t kCodeDirectoryMagic = 0xFADE0C02;
+inline constexpr std::uint32_t kOldestCodeDirectoryVersion = 0x20001;
+inline constexpr std::uint32_t kNewestCodeDirectoryVersion = 0x2FFFF;
+inline constexpr std::uint32_t kVersionWithScatter = 0x20100;
+inline constexpr std::uint32_t kVersionWithTeam = 0x20200;
+inline constexpr std::uint32_t kVersionWithLimit64 = 0x20300;
+inline constexpr std::uint32_t kVersionWithExecutableSegment = 0x20400;
+inline constexpr std::uint32_t kVersionWithRuntime = 0x20500;
+
+/// One for each slot that may hold one.
+inline constexpr std::size_t kMaximumCodeDirectories = 6;
+
+/// Bytes of the header of a code directory of this version.
+std::size_t codeDirectoryHeaderSize(std::uint32_t version);
+
+/// A well-formed code directory. A value: it owns a copy of its bytes.
+class CodeDirectory {
+  public:
+    /// `blob` with its header and nothing behind it. Throws CodeError or foundation::ShortRead when it is not
+    /// well formed.
+    static CodeDirectory parse(ByteView blob);
+
+    /// The digest type a code directory claims, which may be none of ours. Throws as parse() does when `blob`
+    /// is too short to tell, or no code directory.
+    static std::uint8_t digestTypeNumberOf(ByteView blob);
+
+    std::uint32_t version() const noexcept { return version_; }
+    std::uint32_t flags() const noexcept { return flags_; }
+    DigestType digestType() const noexcept { return digestType_; }
+    const std::string& identifier() const noexcept { return identifier_; }
+    const std::optional<std::string>& teamIdentifier() const noexcept { return teamIdentifier_; }
+    ByteView bytes() const noexcept { return bytes_; }
+
+    /// The digest that special slot `slot` (from 1 on) demands of its component; nothing when the directory
+    /// has no such slot or its digest is all zero, which demands nothing.
+    std::optional<Data> specialSlotDigest(std::uint32_t slot) const;
+
+    /// The cdhash.
+    Data codeHash() const;
+
+  private:
+    CodeDirectory() = default;
+
+    Data bytes_;
+    std::uint32_t version_ = 0;
+    std::uint32_t flags_ = 0;
+    std::uint32_t hashOffset_ = 0;
+    std::uint32_t specialSlots_ = 0;
+    DigestType digestType_ = DigestType::sha256;
+    std::string identifier_;
+    std::optional<std::string> teamIdentifier_;
+};
+
+}  // namespace pinwell::codesign

@@ -1,0 +1,119 @@
+#include "codesign/code_signature.h"
+
+#include <algorithm>
+
+#include "codesign/cms_signature.h"
+#include "codesign/code_error.h"
+#include "codesign/disk_image_trailer.h"
+#include "codesign/superblob.h"
+#include "foundation/byte_reader.h"
+
+namespace pinwell::codesign {
+
+namespace {
+
+constexpr std::uint32_t kWrapperMagic = 0xFADE0B01;
+
+/// The special slots whose component travels with the signature.
+constexpr std::uint32_t kCoveredSlots[] = {kSlotRequirements, kSlotEntitlements, kSlotTrailer,
+                                           kSlotDerEntitlements};
+
+bool isAlternate(std::uint32_t slot) {
+    return slot >= kSlotFirstAlternate && slot <= kSlotLastAlternate;
+}
+
+bool isWanted(std::uint32_t slot) {
+    // Not the trailer's slot: that component is the file's own trailer, not something the superblob carries.
+    return slot == kSlotCodeDirectory || slot == kSlotRequirements || slot == kSlotEntitlements ||
+           slot == kSlotDerEntitlements || isAlternate(slot);
+}
+
+Data unwrapCms(const Blob& blob) {
+    if (blob.magic != kWrapperMagic) refuse("the CMS blob has a wrong magic");
+    return foundation::toData(blob.bytes.subspan(kBlobHeaderSize));
+}
+
+}  // namespace
+
+SignatureComponents componentsOfSuperBlob(ByteView superblob) {
+    SignatureComponents components;
+    std::size_t directories = 0;
+    for (const Blob& blob : parseSuperBlob(superblob)) {
+        if (blob.magic == kCodeDirectoryMagic) ++directories;
+        if (blob.slot == kSlotCms) {
+            components.cms = unwrapCms(blob);
+        } else if (isWanted(blob.slot)) {
+            components.blobs.emplace(blob.slot, foundation::toData(blob.bytes));
+        }
+    }
+    if (directories > kMaximumCodeDirectories) refuse("too many code directories");
+    return components;
+}
+
+std::optional<CodeSignature> CodeSignature::parse(SignatureComponents components) {
+    std::vector<CodeDirectory> directories;
+    for (const auto& [slot, blob] : components.blobs) {
+        if (slot != kSlotCodeDirectory && !isAlternate(slot)) continue;
+        const bool known = digestTypeNumbered(CodeDirectory::digestTypeNumberOf(blob)).has_value();
+        if (isAlternate(slot) && directories.empty())
+            refuse("alternate code directories without a primary one");
+        if (isAlternate(slot) && !known) continue;
+        CodeDirectory directory = CodeDirectory::parse(blob);
+        const auto sameType = [&directory](const CodeDirectory& other) {
+            return other.digestType() == directory.digestType();
+        };
+        if (std::any_of(directories.begin(), directories.end(), sameType)) {
+            refuse("two code directories of one digest type");
+        }
+        directories.push_back(std::move(directory));
+    }
+    if (directories.empty()) return std::nullopt;
+
+    CodeSignature signature;
+    signature.primary_ = foundation::toData(directories.front().bytes());
+    const auto strongest = std::max_element(
+        directories.begin(), directories.end(), [](const CodeDirectory& a, const CodeDirectory& b) {
+            return digestStrength(a.digestType()) < digestStrength(b.digestType());
+        });
+    std::rotate(directories.begin(), strongest, strongest + 1);
+    signature.directories_ = std::move(directories);
+    signature.components_ = std::move(components);
+    return signature;
+}
+
+void CodeSignature::requireValid() const {
+    for (const CodeDirectory& directory : directories_) {
+        for (const std::uint32_t slot : kCoveredSlots) {
+            const auto component = components_.blobs.find(slot);
+            if (component == components_.blobs.end()) continue;
+            const std::optional<Data> demanded = directory.specialSlotDigest(slot);
+            if (demanded && *demanded != digest(directory.digestType(), component->second)) {
+                refuse("a component has not the digest that the code directory demands");
+            }
+        }
+    }
+    if (components_.cms.empty()) {
+        if ((chosen().flags() & kFlagAdHoc) == 0) refuse("no signer, and not ad hoc");
+    } else if (!verifyDetachedCms(components_.cms, primary_)) {
+        refuse("the signer's signature does not verify");
+    }
+}
+
+SigningInformation CodeSignature::information(std::uint32_t sets) const {
+    SigningInformation information;
+    information.unique = chosen().codeHash();
+    information.digestAlgorithm = static_cast<std::uint32_t>(chosen().digestType());
+    information.flags = chosen().flags();
+    information.identifier = chosen().identifier();
+    for (const CodeDirectory& directory : directories_) {
+        information.cdHashes.push_back(directory.codeHash());
+        information.digestAlgorithms.push_back(static_cast<std::uint32_t>(directory.digestType()));
+    }
+    if ((sets & kSigningInformation) != 0) {
+        information.teamIdentifier = chosen().teamIdentifier();
+        information.secureTimestamp = secureTimestamp(components_.cms);
+    }
+    return information;
+}
+
+}  // namespace pinwell::codesign

@@ -1,0 +1,52 @@
+// The trailer of a disk image, as far as its signature needs it. 512 bytes at the very end of the file; all
+// integers are big-endian.
+//
+// | Offset | Size | Field                                     |
+// |--------|------|-------------------------------------------|
+// | 0      | 4    | "koly"                                    |
+// | 4      | 4    | version, 4                                |
+// | 296    | 8    | signature offset, 0 when unsigned         |
+// | 304    | 8    | signature length, 0 when unsigned         |
+#pragma once
+
+#include <cstdint>
+#include <optional>
+
+#include "codesign/executable_image.h"
+
+namespace pinwell::codesign {
+
+inline constexpr std::size_t kTrailerSize = 512;
+
+/// The special slot of a code directory that covers the trailer.
+inline constexpr std::uint32_t kSlotTrailer = 6;
+
+/// A disk image's trailer. A value.
+class DiskImageTrailer {
+  public:
+    /// The trailer at the end of `source`; nothing when it does not end in one. Throws CodeError only when
+    /// the bytes cannot be read.
+    static std::optional<DiskImageTrailer> read(const ByteSource& source);
+
+    /// Where the trailer itself begins.
+    std::uint64_t offset() const noexcept { return offset_; }
+
+    /// Where the trailer says the signature stands; nothing when offset or length is zero. Nothing is
+    /// checked.
+    std::optional<FileRange> signature() const;
+
+    /// Where the signed part of the image ends: at a signature that ends at the trailer, else at the trailer.
+    /// So an image has the same signed part before and after something was put in front of its trailer.
+    std::uint64_t signedLimit() const;
+
+    /// The bytes that a signature covers: the trailer with both of its signature fields zeroed.
+    Data canonicalBytes() const;
+
+  private:
+    DiskImageTrailer(Data bytes, std::uint64_t offset) : bytes_(std::move(bytes)), offset_(offset) {}
+
+    Data bytes_;
+    std::uint64_t offset_;
+};
+
+}  // namespace pinwell::codesign

@@ -1,0 +1,77 @@
+// Executable images, as far as finding their signature needs it.
+//
+// A thin image, in the byte order that its magic shows:
+//
+// | Offset   | Size         | Field                                                        |
+// |----------|--------------|--------------------------------------------------------------|
+// | 0        | 4            | magic FEEDFACE (32-bit) or FEEDFACF (64-bit)                 |
+// | 4        | 8            | CPU type, CPU subtype                                        |
+// | 12       | 4            | file type                                                    |
+// | 16       | 4            | count of load commands                                       |
+// | 20       | 4            | size of all load commands                                    |
+// | 24       | 4            | flags; a 64-bit image has 4 reserved bytes more              |
+// | 28 or 32 |              | load commands, each: command (4), size with these eight (4)  |
+//
+// Load command 0x1D, 16 bytes, gives the signature's offset and length, counted from the start of the image.
+//
+// A universal image, always big-endian:
+//
+// | Offset | Size       | Field                                                                         |
+// |--------|------------|-------------------------------------------------------------------------------|
+// | 0      | 4          | magic CAFEBABE (32-bit entries) or CAFEBABF (64-bit entries)                  |
+// | 4      | 4          | count of slices                                                               |
+// | 8      | 20 a slice | CPU type, CPU subtype, offset, size, alignment (4 each)                       |
+// | 8      | 32 a slice | CPU type, CPU subtype (4 each), offset, size (8 each), alignment, spare (4)   |
+//
+// Each slice is a thin image. Refused: no slices, more than the limit, slices that overlap each other or the
+// list, slices that reach past the file; load commands that do not fit the space set aside for them, two that
+// give a signature, a signature that overlaps the load commands or reaches past its slice.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <vector>
+
+#include "codesign/byte_source.h"
+
+namespace pinwell::codesign {
+
+inline constexpr std::uint32_t kCpuType64Arm = 0x0100000C;
+inline constexpr std::uint32_t kCpuType64X86 = 0x01000007;
+inline constexpr std::uint32_t kLoadCommandSignature = 0x1D;
+
+/// There are about a dozen CPU types.
+inline constexpr std::uint32_t kMaximumSlices = 64;
+
+/// The load commands of very large programs take some 100 KiB.
+inline constexpr std::uint32_t kMaximumLoadCommandsSize = 4 * 1024 * 1024;
+
+/// A part of a file.
+struct FileRange {
+    std::uint64_t offset = 0;
+    std::uint64_t length = 0;
+
+    bool operator==(const FileRange&) const = default;
+};
+
+/// One thin image and where it stands in its file.
+struct ImageSlice {
+    std::uint32_t cpuType = 0;
+    FileRange range;
+};
+
+/// Whether the first bytes are those of an executable image. Throws CodeError only when they cannot be read.
+bool isExecutableImage(const ByteSource& source);
+
+/// The slices of a universal image, or the whole of a thin one; at least one. Throws CodeError.
+std::vector<ImageSlice> readSlices(const ByteSource& source);
+
+/// The slice that stands for all: the first of CPU type 0x0100000C, else the first of 0x01000007, else the
+/// first; the same on every host, so that every host asks for the same ticket.
+const ImageSlice& preferredSlice(const std::vector<ImageSlice>& slices);
+
+/// Where the signature of a slice stands in the file; nothing when it is not signed. Throws CodeError or
+/// foundation::ShortRead.
+std::optional<FileRange> findImageSignature(const ByteSource& source, const ImageSlice& slice);
+
+}  // namespace pinwell::codesign

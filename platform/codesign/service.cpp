@@ -1,0 +1,91 @@
+#include "codesign/service.h"
+
+#include <iterator>
+#include <set>
+
+#include "codesign/code_error.h"
+#include "codesign/nested_code.h"
+#include "foundation/byte_reader.h"
+
+namespace pinwell::codesign {
+
+namespace {
+
+constexpr std::uint32_t kRequiredValidityFlags = kDoNotValidateExecutable | kDoNotValidateResources;
+
+/// Runs `body`, which answers a status; what it throws becomes one.
+template <class Body>
+Status asStatus(Body body) {
+    try {
+        return body();
+    } catch (const CodeError& error) {
+        return error.status();
+    } catch (const foundation::ShortRead&) {
+        return kInvalidSignature;
+    }
+}
+
+FileCode& fileCode(StaticCode& code) {
+    auto* own = dynamic_cast<FileCode*>(&code);
+    if (own == nullptr) throw CodeError(kParameterError, "code of another service");
+    return *own;
+}
+
+std::shared_ptr<FileCode> codeAt(const URL& url, const MainExecutableFinder& finder) {
+    if (!url.isFileURL() || url.path().empty()) throw CodeError(kParameterError, "not a file URL");
+    return FileCode::atPath(url.path(), finder);
+}
+
+}  // namespace
+
+Status FileCodeSigningService::createStaticCode(const URL& path, std::uint32_t flags,
+                                                std::shared_ptr<StaticCode>& code) {
+    return asStatus([&] {
+        if (flags != 0) return kParameterError;
+        code = codeAt(path, finder_);
+        return kSuccess;
+    });
+}
+
+Status FileCodeSigningService::checkValidity(StaticCode& code, std::uint32_t flags) {
+    return asStatus([&] {
+        if (flags != kRequiredValidityFlags) return kUnimplemented;
+        const std::optional<CodeSignature>& signature = fileCode(code).signature();
+        if (!signature) return kUnsigned;
+        signature->requireValid();
+        return kSuccess;
+    });
+}
+
+Status FileCodeSigningService::copySigningInformation(StaticCode& code, std::uint32_t sets,
+                                                      std::optional<SigningInformation>& information) {
+    return asStatus([&] {
+        const std::optional<CodeSignature>& signature = fileCode(code).signature();
+        information = signature ? signature->information(sets) : SigningInformation();
+        return kSuccess;
+    });
+}
+
+Status FileCodeSigningService::copyAllCodeHashes(const URL& path, std::vector<SigningInformation>& all) {
+    return asStatus([&] {
+        const std::shared_ptr<FileCode> code = codeAt(path, finder_);
+        std::vector<CodeSignature> signatures = code->allSignatures();
+        for (const CodeSignature& signature : signatures) signature.requireValid();
+        if (code->inBundle()) {
+            std::vector<CodeSignature> nested = findNestedSignatures(path.path(), finder_);
+            std::move(nested.begin(), nested.end(), std::back_inserter(signatures));
+        }
+        // The walk has met the main executable again, and one library may lie in many places.
+        std::set<std::vector<Data>> known;
+        std::vector<SigningInformation> found;
+        for (const CodeSignature& signature : signatures) {
+            SigningInformation information = signature.information(kSigningInformation);
+            if (known.insert(information.cdHashes).second) found.push_back(std::move(information));
+        }
+        if (found.empty()) return kUnsigned;
+        all = std::move(found);
+        return kSuccess;
+    });
+}
+
+}  // namespace pinwell::codesign

@@ -1,0 +1,22 @@
+// The code-signing service over files of this machine.
+#pragma once
+
+#include "codesign/static_code.h"
+
+namespace pinwell::codesign {
+
+class FileCodeSigningService final : public CodeSigningService {
+  public:
+    explicit FileCodeSigningService(MainExecutableFinder finder) : finder_(std::move(finder)) {}
+
+    Status createStaticCode(const URL& path, std::uint32_t flags, std::shared_ptr<StaticCode>& code) override;
+    Status checkValidity(StaticCode& code, std::uint32_t flags) override;
+    Status copySigningInformation(StaticCode& code, std::uint32_t sets,
+                                  std::optional<SigningInformation>& information) override;
+    Status copyAllCodeHashes(const URL& path, std::vector<SigningInformation>& all) override;
+
+  private:
+    MainExecutableFinder finder_;
+};
+
+}  // namespace pinwell::codesign

@@ -1,0 +1,136 @@
+#include "codesign/static_code.h"
+
+#include <sys/stat.h>
+
+#include <cerrno>
+
+#include "codesign/code_error.h"
+#include "codesign/executable_image.h"
+#include "codesign/superblob.h"
+
+namespace pinwell::codesign {
+
+namespace {
+
+bool isDirectory(const std::string& path) {
+    struct stat status = {};
+    if (lstat(path.c_str(), &status) == 0) return S_ISDIR(status.st_mode);
+    const bool nothingThere = errno == ENOENT || errno == ENOTDIR || errno == ELOOP;
+    throw CodeError(nothingThere ? kStaticCodeNotFound : kIOError, "cannot examine the path");
+}
+
+/// A whole file of the separate form; nothing when it is not there.
+std::optional<Data> readSignatureFile(const std::string& path) {
+    try {
+        const FileSource file(path);
+        if (file.size() > kMaximumSignatureFileLength) refuse("a signature file is too long");
+        return file.read(0, static_cast<std::size_t>(file.size()));
+    } catch (const CodeError& error) {
+        if (error.status() == kStaticCodeNotFound) return std::nullopt;
+        throw;
+    }
+}
+
+std::optional<CodeSignature> readSeparateSignature(const std::string& directory) {
+    std::optional<Data> codeDirectory = readSignatureFile(directory + "/CodeDirectory");
+    if (!codeDirectory) return std::nullopt;
+    SignatureComponents components;
+    components.blobs.emplace(kSlotCodeDirectory, std::move(*codeDirectory));
+    if (std::optional<Data> requirements = readSignatureFile(directory + "/CodeRequirements")) {
+        components.blobs.emplace(kSlotRequirements, std::move(*requirements));
+    }
+    components.cms = readSignatureFile(directory + "/CodeSignature").value_or(Data());
+    return CodeSignature::parse(std::move(components));
+}
+
+}  // namespace
+
+FileCode::FileCode(CodeKind kind, std::unique_ptr<ByteSource> source, std::optional<DiskImageTrailer> trailer,
+                   std::string signatureDirectory)
+    : kind_(kind),
+      source_(std::move(source)),
+      trailer_(std::move(trailer)),
+      signatureDirectory_(std::move(signatureDirectory)) {}
+
+std::shared_ptr<FileCode> FileCode::atPath(const std::string& path, const MainExecutableFinder& finder) {
+    const bool bundle = isDirectory(path);
+    const std::optional<std::string> file = bundle ? finder(path) : path;
+    if (!file) throw CodeError(kStaticCodeNotFound, "the directory has no main executable");
+
+    auto source = std::make_unique<FileSource>(*file);
+    std::optional<DiskImageTrailer> trailer = DiskImageTrailer::read(*source);
+    CodeKind kind = CodeKind::opaqueFile;
+    if (trailer) {
+        kind = CodeKind::diskImage;
+    } else if (isExecutableImage(*source)) {
+        kind = CodeKind::executableImage;
+    }
+    if (bundle && kind != CodeKind::executableImage) {
+        kind = CodeKind::separatelySigned;
+        trailer.reset();
+    }
+    std::string signatureDirectory = bundle ? path + "/Contents/_CodeSignature" : std::string();
+    return std::shared_ptr<FileCode>(
+        new FileCode(kind, std::move(source), std::move(trailer), std::move(signatureDirectory)));
+}
+
+std::optional<CodeSignature> FileCode::signatureFrom(ByteView superblob) const {
+    SignatureComponents components = componentsOfSuperBlob(superblob);
+    if (trailer_) components.blobs.emplace(kSlotTrailer, trailer_->canonicalBytes());
+    return CodeSignature::parse(std::move(components));
+}
+
+std::optional<CodeSignature> FileCode::readSignature() const {
+    std::optional<FileRange> area;
+    switch (kind_) {
+        case CodeKind::opaqueFile:
+            return std::nullopt;
+        case CodeKind::separatelySigned:
+            return readSeparateSignature(signatureDirectory_);
+        case CodeKind::diskImage:
+            area = trailer_->signature();
+            if (area &&
+                (area->offset > trailer_->offset() || area->length > trailer_->offset() - area->offset)) {
+                refuse("the signature reaches into the disk image's trailer");
+            }
+            break;
+        case CodeKind::executableImage:
+            area = findImageSignature(*source_, preferredSlice(readSlices(*source_)));
+            break;
+    }
+    if (!area) return std::nullopt;
+    return signatureFrom(readSuperBlob(*source_, area->offset, area->length));
+}
+
+const std::optional<CodeSignature>& FileCode::signature() {
+    if (!signatureRead_) {
+        signature_ = readSignature();
+        signatureRead_ = true;
+    }
+    return signature_;
+}
+
+std::vector<CodeSignature> FileCode::allSignatures() {
+    std::vector<CodeSignature> all;
+    if (kind_ != CodeKind::executableImage) {
+        if (signature()) all.push_back(*signature());
+        return all;
+    }
+    for (const ImageSlice& slice : readSlices(*source_)) {
+        const std::optional<FileRange> area = findImageSignature(*source_, slice);
+        if (!area) continue;
+        std::optional<CodeSignature> found =
+            signatureFrom(readSuperBlob(*source_, area->offset, area->length));
+        if (found) all.push_back(std::move(*found));
+    }
+    return all;
+}
+
+void FileCode::setDetachedSignature(ByteView superblob) {
+    std::optional<CodeSignature> detached = signatureFrom(superblob);
+    if (!detached) refuse("the detached signature has no code directory");
+    signature_ = std::move(detached);
+    signatureRead_ = true;
+}
+
+}  // namespace pinwell::codesign

@@ -1,0 +1,73 @@
+// Code at a path: what kind of file stands for it and where its signature is kept.
+//
+// | At the path                                          | Stands for it       | Signature |
+// |------------------------------------------------------|---------------------|------------------------------------|
+// | a regular file that ends in a disk image trailer     | the file            | superblob that the trailer
+// gives   | | another regular file that begins as executable image | the file            | superblob that
+// load command 0x1D of the preferred slice gives | | any other regular file                               |
+// the file            | none of its own                    | | a directory whose main executable is such an
+// image   | the main executable | as for the image                   | | a directory with any other main
+// executable           | the main executable | the files `CodeDirectory`, `CodeRequirements` and
+// `CodeSignature` (the bare CMS message) in Contents/_CodeSignature |
+//
+// A link in the last component is not followed, neither here nor for the files of the separate form.
+#pragma once
+
+#include <functional>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "codesign/byte_source.h"
+#include "codesign/code_signature.h"
+#include "codesign/disk_image_trailer.h"
+
+namespace pinwell::codesign {
+
+/// The path of the main executable of a directory opened as a bundle; nothing when it has none.
+using MainExecutableFinder = std::function<std::optional<std::string>(const std::string& bundlePath)>;
+
+enum class CodeKind { executableImage, diskImage, opaqueFile, separatelySigned };
+
+/// The StaticCode of this service. Holds the file open, so that all answers are about one file even when its
+/// path gets another; keeps the signature once it was read.
+class FileCode final : public StaticCode {
+  public:
+    /// Throws CodeError: kStaticCodeNotFound when nothing there could be code, kIOError when it cannot be
+    /// read.
+    static std::shared_ptr<FileCode> atPath(const std::string& path, const MainExecutableFinder& finder);
+
+    CodeKind kind() const noexcept { return kind_; }
+    bool inBundle() const noexcept { return !signatureDirectory_.empty(); }
+    const ByteSource& source() const noexcept { return *source_; }
+    const std::optional<DiskImageTrailer>& trailer() const noexcept { return trailer_; }
+
+    /// The signature; nothing when the code is not signed. Throws CodeError or foundation::ShortRead.
+    const std::optional<CodeSignature>& signature();
+
+    /// The signatures of all slices, in the order of the slices; the code's one signature where there are no
+    /// slices. Unsigned slices have no entry. Throws CodeError or foundation::ShortRead.
+    std::vector<CodeSignature> allSignatures();
+
+    /// Answers from the signature in `superblob` from now on. Throws CodeError or foundation::ShortRead.
+    void setDetachedSignature(ByteView superblob);
+
+  private:
+    FileCode(CodeKind kind, std::unique_ptr<ByteSource> source, std::optional<DiskImageTrailer> trailer,
+             std::string signatureDirectory);
+
+    std::optional<CodeSignature> readSignature() const;
+
+    /// What the file itself adds to the components that a superblob carries.
+    std::optional<CodeSignature> signatureFrom(ByteView superblob) const;
+
+    CodeKind kind_;
+    std::unique_ptr<ByteSource> source_;
+    std::optional<DiskImageTrailer> trailer_;
+    std::string signatureDirectory_;  // of a bundle; empty for a plain file
+    std::optional<CodeSignature> signature_;
+    bool signatureRead_ = false;
+};
+
+}  // namespace pinwell::codesign

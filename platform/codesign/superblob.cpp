@@ -1,0 +1,80 @@
+#include "codesign/superblob.h"
+
+#include <algorithm>
+
+#include "codesign/code_error.h"
+#include "foundation/byte_reader.h"
+
+namespace pinwell::codesign {
+
+using foundation::ByteReader;
+
+namespace {
+
+struct Range {
+    std::uint64_t begin;
+    std::uint64_t end;
+};
+
+std::uint32_t readMagicAndLength(ByteReader& reader) {
+    if (reader.be32("superblob magic") != kSuperBlobMagic) refuse("not a superblob");
+    const std::uint32_t length = reader.be32("superblob length");
+    if (length < kSuperBlobHeaderSize) refuse("the superblob is shorter than its header");
+    if (length > kMaximumSuperBlobLength) refuse("the superblob is too long");
+    return length;
+}
+
+void requireDistinctSlots(const std::vector<Blob>& blobs) {
+    std::vector<std::uint32_t> slots;
+    for (const Blob& blob : blobs) slots.push_back(blob.slot);
+    std::sort(slots.begin(), slots.end());
+    if (std::adjacent_find(slots.begin(), slots.end()) != slots.end()) refuse("two entries for one slot");
+}
+
+void requireSeparate(std::vector<Range> ranges) {
+    std::sort(ranges.begin(), ranges.end(), [](Range a, Range b) { return a.begin < b.begin; });
+    const auto overlap =
+        std::adjacent_find(ranges.begin(), ranges.end(), [](Range a, Range b) { return b.begin < a.end; });
+    if (overlap != ranges.end()) refuse("blobs overlap");
+}
+
+}  // namespace
+
+std::vector<Blob> parseSuperBlob(ByteView superblob) {
+    ByteReader header(superblob);
+    const std::uint32_t length = readMagicAndLength(header);
+    const ByteReader whole = ByteReader(superblob).sub(0, length, "superblob");
+
+    ByteReader index = whole;
+    index.seek(8, "superblob count");
+    const std::uint32_t count = index.be32("superblob count");
+    if (count > kMaximumBlobCount) refuse("too many blobs");
+
+    std::vector<Blob> blobs;
+    std::vector<Range> ranges = {{0, kSuperBlobHeaderSize + std::uint64_t{8} * count}};
+    for (std::uint32_t i = 0; i < count; ++i) {
+        const std::uint32_t slot = index.be32("index slot");
+        const std::uint32_t offset = index.be32("index offset");
+        ByteReader blob = whole.sub(offset, kBlobHeaderSize, "blob header");
+        const std::uint32_t magic = blob.be32("blob magic");
+        const std::uint32_t blobLength = blob.be32("blob length");
+        if (blobLength < kBlobHeaderSize) refuse("a blob is shorter than its header");
+        ByteReader content = whole.sub(offset, blobLength, "blob");
+        blobs.push_back({slot, magic, content.bytes(blobLength, "blob")});
+        ranges.push_back({offset, std::uint64_t{offset} + blobLength});
+    }
+    requireDistinctSlots(blobs);
+    requireSeparate(std::move(ranges));
+    return blobs;
+}
+
+Data readSuperBlob(const ByteSource& source, std::uint64_t offset, std::uint64_t areaLength) {
+    if (areaLength < kSuperBlobHeaderSize) refuse("the signature area is too short for a superblob");
+    const Data start = source.read(offset, kSuperBlobHeaderSize);
+    ByteReader header(start);
+    const std::uint32_t length = readMagicAndLength(header);
+    if (length > areaLength) refuse("the superblob is longer than its area");
+    return source.read(offset, length);
+}
+
+}  // namespace pinwell::codesign

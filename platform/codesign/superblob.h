@@ -1,0 +1,59 @@
+// The superblob: the container of an embedded signature. All integers are big-endian; offsets count from its
+// start.
+//
+// | Offset        | Size      | Field |
+// |---------------|-----------|------------------------------------------------------------------------------|
+// | 0             | 4         | magic FADE0CC0 | | 4             | 4         | length of the whole, this
+// header included                                    | | 8             | 4         | count of index entries |
+// | 12            | 8 x count | index: slot (4), offset of the blob (4) | | anywhere else |           |
+// blobs, each: magic (4), length with these eight bytes (4), payload           |
+//
+// The index may name the blobs in any order, and gaps may lie between them. What follows the superblob's own
+// length in the area set aside for it is padding and is never looked at. Refused: a wrong magic, a length or
+// count that does not fit, two entries for one slot, blobs that overlap each other or the index, and whatever
+// exceeds the limits below.
+#pragma once
+
+#include <cstdint>
+#include <vector>
+
+#include "codesign/byte_source.h"
+
+namespace pinwell::codesign {
+
+inline constexpr std::uint32_t kSuperBlobMagic = 0xFADE0CC0;
+inline constexpr std::size_t kSuperBlobHeaderSize = 12;
+inline constexpr std::size_t kBlobHeaderSize = 8;
+
+/// Longest superblob that is read: an image's page hashes grow with it (32 bytes for 4 KiB), so this is room
+/// for some 8 GiB of code.
+inline constexpr std::uint32_t kMaximumSuperBlobLength = 64 * 1024 * 1024;
+
+/// Largest number of index entries; a signature has about ten.
+inline constexpr std::uint32_t kMaximumBlobCount = 1024;
+
+/// Slots of the index.
+inline constexpr std::uint32_t kSlotCodeDirectory = 0;
+inline constexpr std::uint32_t kSlotRequirements = 2;
+inline constexpr std::uint32_t kSlotEntitlements = 5;
+inline constexpr std::uint32_t kSlotDerEntitlements = 7;
+inline constexpr std::uint32_t kSlotFirstAlternate = 0x1000;
+inline constexpr std::uint32_t kSlotLastAlternate = 0x1004;
+inline constexpr std::uint32_t kSlotCms = 0x10000;
+
+/// One blob of a superblob.
+struct Blob {
+    std::uint32_t slot;
+    std::uint32_t magic;
+    ByteView bytes;  // header included
+};
+
+/// The blobs, in index order, as views of `superblob`, which may be followed by padding. Throws CodeError or
+/// foundation::ShortRead.
+std::vector<Blob> parseSuperBlob(ByteView superblob);
+
+/// The superblob that stands in `source` at `offset`, in an area of `areaLength` bytes, without its padding.
+/// Only the superblob itself is read. Throws CodeError.
+Data readSuperBlob(const ByteSource& source, std::uint64_t offset, std::uint64_t areaLength);
+
+}  // namespace pinwell::codesign
