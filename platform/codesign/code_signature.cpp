@@ -12,8 +12,6 @@ namespace pinwell::codesign {
 
 namespace {
 
-constexpr std::uint32_t kWrapperMagic = 0xFADE0B01;
-
 /// The special slots whose component travels with the signature.
 constexpr std::uint32_t kCoveredSlots[] = {kSlotRequirements, kSlotEntitlements, kSlotTrailer,
                                            kSlotDerEntitlements};

@@ -36,11 +36,13 @@ enum class DigestType : std::uint8_t { sha1 = 1, sha256 = 2, sha256Truncated = 3
 /// Code-directory flag: ad hoc, without a signer.
 inline constexpr std::uint32_t kFlagAdHoc = 0x2;
 
-/// What copySigningInformation answers. Lists go index for index, the chosen code directory first.
+/// What copySigningInformation answers; nothing of it is there for code that is not signed. Lists go index
+/// for index, one entry a code directory, the chosen (strongest) one first; what stands alone is said by the
+/// chosen one.
 struct SigningInformation {
-    std::optional<Data> unique;  // the cdhash of the chosen code directory
+    std::optional<Data> unique;  // the cdhash: 20 bytes, 48 for SHA-384
     std::vector<Data> cdHashes;
-    std::vector<std::uint32_t> digestAlgorithms;
+    std::vector<std::uint32_t> digestAlgorithms;  // numbers of DigestType
     std::optional<std::uint32_t> digestAlgorithm;
     std::optional<std::uint32_t> flags;
     std::optional<std::string> identifier;
@@ -48,7 +50,8 @@ struct SigningInformation {
     std::optional<Date> secureTimestamp;
 };
 
-/// Which sets of information are wanted; may be combined.
+/// Which sets of information are wanted; may be combined. Team identifier and secure timestamp belong to the
+/// signing set, all else is in every set; the other two add nothing here.
 inline constexpr std::uint32_t kInternalInformation = 1;
 inline constexpr std::uint32_t kSigningInformation = 2;
 inline constexpr std::uint32_t kContentInformation = 16;
@@ -57,12 +60,30 @@ inline constexpr std::uint32_t kContentInformation = 16;
 inline constexpr std::uint32_t kDoNotValidateExecutable = 2;
 inline constexpr std::uint32_t kDoNotValidateResources = 4;
 
+/// Signer flag: sign the file as opaque data, whatever structure it has.
+inline constexpr std::uint32_t kSignOpaque = 8;
+
+/// What a signer signs with. There is no identity among it: this platform signs ad hoc only.
+struct SignerParameters {
+    std::string identifier;                           // not empty, without a zero byte
+    std::shared_ptr<Data> detachedSignature;          // takes the signature; the file stays as it is
+    DigestType digestAlgorithm = DigestType::sha256;  // no other is supported
+};
+
 /// Code at a path. Opaque; made by the service that later answers about it.
 class StaticCode {
   public:
     virtual ~StaticCode() = default;
 };
 
+/// Signs code. Opaque; made by the service that later signs with it.
+class Signer {
+  public:
+    virtual ~Signer() = default;
+};
+
+/// Out-parameters are written on success only. Every method answers kParameterError for an object of another
+/// service.
 class CodeSigningService {
   public:
     virtual ~CodeSigningService() = default;
@@ -74,14 +95,35 @@ class CodeSigningService {
                                     std::shared_ptr<StaticCode>& code) = 0;
 
     /// Static validity as this platform asks for it: structure, component digests and the CMS signature.
-    /// Page hashes and sealed resources are not checked (both "do not validate" flags must be given).
+    /// Page hashes and sealed resources are not checked (both "do not validate" flags must be given, and no
+    /// others; kUnimplemented otherwise). kUnsigned when there is no code directory, kInvalidSignature when
+    /// anything is wrong.
     virtual Status checkValidity(StaticCode& code, std::uint32_t flags) = 0;
 
     virtual Status copySigningInformation(StaticCode& code, std::uint32_t sets,
                                           std::optional<SigningInformation>& information) = 0;
 
+    /// A signer for addSignature; `flags` must be kSignOpaque. A service that does not sign need not override
+    /// this method and the next two.
+    virtual Status createSigner(const SignerParameters&, std::uint32_t /*flags*/, std::shared_ptr<Signer>&) {
+        return kUnimplemented;
+    }
+
+    /// Signs the file of `code` ad hoc, into the signer's detached buffer, whose former contents are
+    /// replaced. Reads every byte of the file, with bounded memory. `flags` must be 0. The same bytes give
+    /// the same signature.
+    virtual Status addSignature(Signer&, StaticCode&, std::uint32_t /*flags*/) { return kUnimplemented; }
+
+    /// From now on the answers about `code` come from the signature in `detached`. `flags` must be 0.
+    virtual Status setDetachedSignature(StaticCode&, const Data& /*detached*/, std::uint32_t /*flags*/) {
+        return kUnimplemented;
+    }
+
     /// Every code hash that the artefact at `path` is known by: the cdhashes of all code directories of all
-    /// signed slices, and of the signed code nested in a bundle. For a service that issues tickets.
+    /// signed slices, and of the signed code nested in a bundle, one entry a signature. For a service that
+    /// issues tickets. The artefact's own signatures must be valid (kInvalidSignature); nested code that is
+    /// not is passed over. kUnsigned when nothing is signed, kUnimplemented for a bundle too large to be
+    /// walked to its end.
     virtual Status copyAllCodeHashes(const URL& path, std::vector<SigningInformation>& all) = 0;
 };
 

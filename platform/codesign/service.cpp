@@ -3,6 +3,7 @@
 #include <iterator>
 #include <set>
 
+#include "codesign/adhoc_signer.h"
 #include "codesign/code_error.h"
 #include "codesign/nested_code.h"
 #include "foundation/byte_reader.h"
@@ -10,6 +11,9 @@
 namespace pinwell::codesign {
 
 namespace {
+
+/// What a signer may be asked to write; those in use are about as long as a domain name.
+constexpr std::size_t kMaximumIdentifierLength = 1024;
 
 constexpr std::uint32_t kRequiredValidityFlags = kDoNotValidateExecutable | kDoNotValidateResources;
 
@@ -24,6 +28,11 @@ Status asStatus(Body body) {
         return kInvalidSignature;
     }
 }
+
+struct OpaqueSigner final : Signer {
+    std::string identifier;
+    std::shared_ptr<Data> signature;
+};
 
 FileCode& fileCode(StaticCode& code) {
     auto* own = dynamic_cast<FileCode*>(&code);
@@ -62,6 +71,40 @@ Status FileCodeSigningService::copySigningInformation(StaticCode& code, std::uin
     return asStatus([&] {
         const std::optional<CodeSignature>& signature = fileCode(code).signature();
         information = signature ? signature->information(sets) : SigningInformation();
+        return kSuccess;
+    });
+}
+
+Status FileCodeSigningService::createSigner(const SignerParameters& parameters, std::uint32_t flags,
+                                            std::shared_ptr<Signer>& signer) {
+    if (flags != kSignOpaque || parameters.digestAlgorithm != DigestType::sha256) return kUnimplemented;
+    if (!parameters.detachedSignature) return kParameterError;
+    if (parameters.identifier.empty() || parameters.identifier.size() > kMaximumIdentifierLength ||
+        parameters.identifier.find('\0') != std::string::npos) {
+        return kParameterError;
+    }
+    auto opaque = std::make_shared<OpaqueSigner>();
+    opaque->identifier = parameters.identifier;
+    opaque->signature = parameters.detachedSignature;
+    signer = std::move(opaque);
+    return kSuccess;
+}
+
+Status FileCodeSigningService::addSignature(Signer& signer, StaticCode& code, std::uint32_t flags) {
+    return asStatus([&] {
+        const auto* opaque = dynamic_cast<OpaqueSigner*>(&signer);
+        if (opaque == nullptr || flags != 0) return kParameterError;
+        const FileCode& file = fileCode(code);
+        *opaque->signature = signOpaque(file.source(), file.trailer(), opaque->identifier);
+        return kSuccess;
+    });
+}
+
+Status FileCodeSigningService::setDetachedSignature(StaticCode& code, const Data& detached,
+                                                    std::uint32_t flags) {
+    return asStatus([&] {
+        if (flags != 0) return kParameterError;
+        fileCode(code).setDetachedSignature(detached);
         return kSuccess;
     });
 }

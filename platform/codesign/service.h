@@ -13,6 +13,10 @@ class FileCodeSigningService final : public CodeSigningService {
     Status checkValidity(StaticCode& code, std::uint32_t flags) override;
     Status copySigningInformation(StaticCode& code, std::uint32_t sets,
                                   std::optional<SigningInformation>& information) override;
+    Status createSigner(const SignerParameters& parameters, std::uint32_t flags,
+                        std::shared_ptr<Signer>& signer) override;
+    Status addSignature(Signer& signer, StaticCode& code, std::uint32_t flags) override;
+    Status setDetachedSignature(StaticCode& code, const Data& detached, std::uint32_t flags) override;
     Status copyAllCodeHashes(const URL& path, std::vector<SigningInformation>& all) override;
 
   private:

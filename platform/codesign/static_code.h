@@ -1,15 +1,15 @@
 // Code at a path: what kind of file stands for it and where its signature is kept.
 //
-// | At the path                                          | Stands for it       | Signature |
-// |------------------------------------------------------|---------------------|------------------------------------|
-// | a regular file that ends in a disk image trailer     | the file            | superblob that the trailer
-// gives   | | another regular file that begins as executable image | the file            | superblob that
-// load command 0x1D of the preferred slice gives | | any other regular file                               |
-// the file            | none of its own                    | | a directory whose main executable is such an
-// image   | the main executable | as for the image                   | | a directory with any other main
-// executable           | the main executable | the files `CodeDirectory`, `CodeRequirements` and
-// `CodeSignature` (the bare CMS message) in Contents/_CodeSignature |
+// | At the path                            | Stands for it       | Signature                             |
+// |----------------------------------------|---------------------|---------------------------------------|
+// | a file that ends in an image's trailer | the file            | superblob that the trailer gives      |
+// | a file that begins as executable image | the file            | superblob that its best slice gives   |
+// | any other file                         | the file            | none of its own                       |
+// | a directory, its executable an image   | the main executable | superblob that its best slice gives   |
+// | a directory, its executable no image   | the main executable | three files in Contents/_CodeSignature |
 //
+// The files of that separate form are `CodeDirectory` and `CodeRequirements`, blobs as in a superblob, and
+// `CodeSignature`, the bare CMS message. Whatever ends in a trailer is no executable image.
 // A link in the last component is not followed, neither here nor for the files of the separate form.
 #pragma once
 

@@ -4,6 +4,7 @@
 
 #include "codesign/code_error.h"
 #include "foundation/byte_reader.h"
+#include "foundation/byte_writer.h"
 
 namespace pinwell::codesign {
 
@@ -66,6 +67,20 @@ std::vector<Blob> parseSuperBlob(ByteView superblob) {
     requireDistinctSlots(blobs);
     requireSeparate(std::move(ranges));
     return blobs;
+}
+
+Data buildSuperBlob(const std::vector<std::pair<std::uint32_t, Data>>& blobs) {
+    const std::size_t first = kSuperBlobHeaderSize + 8 * blobs.size();
+    foundation::ByteWriter index;
+    foundation::ByteWriter content;
+    for (const auto& [slot, bytes] : blobs) {
+        index.be32(slot).be32(static_cast<std::uint32_t>(first + content.size()));
+        content.bytes(bytes);
+    }
+    foundation::ByteWriter writer;
+    writer.be32(kSuperBlobMagic).be32(static_cast<std::uint32_t>(first + content.size()));
+    writer.be32(static_cast<std::uint32_t>(blobs.size())).bytes(index.data()).bytes(content.data());
+    return std::move(writer).take();
 }
 
 Data readSuperBlob(const ByteSource& source, std::uint64_t offset, std::uint64_t areaLength) {

@@ -1,20 +1,23 @@
 // The superblob: the container of an embedded signature. All integers are big-endian; offsets count from its
 // start.
 //
-// | Offset        | Size      | Field |
-// |---------------|-----------|------------------------------------------------------------------------------|
-// | 0             | 4         | magic FADE0CC0 | | 4             | 4         | length of the whole, this
-// header included                                    | | 8             | 4         | count of index entries |
-// | 12            | 8 x count | index: slot (4), offset of the blob (4) | | anywhere else |           |
-// blobs, each: magic (4), length with these eight bytes (4), payload           |
+// | Offset     | Size      | Field                                                        |
+// |------------|-----------|--------------------------------------------------------------|
+// | 0          | 4         | magic FADE0CC0                                               |
+// | 4          | 4         | length of the whole, this header included                    |
+// | 8          | 4         | count of index entries                                       |
+// | 12         | 8 x count | index: slot (4), offset of the blob (4)                      |
+// | behind it  |           | blobs: magic (4), length with these 8 bytes (4), payload     |
 //
 // The index may name the blobs in any order, and gaps may lie between them. What follows the superblob's own
-// length in the area set aside for it is padding and is never looked at. Refused: a wrong magic, a length or
-// count that does not fit, two entries for one slot, blobs that overlap each other or the index, and whatever
-// exceeds the limits below.
+// length in the area set aside for it is padding and is never looked at.
+//
+// Refused: a wrong magic, a length or count that does not fit, two entries for one slot, blobs that overlap
+// each other or the index, and whatever exceeds the limits below.
 #pragma once
 
 #include <cstdint>
+#include <utility>
 #include <vector>
 
 #include "codesign/byte_source.h"
@@ -22,6 +25,10 @@
 namespace pinwell::codesign {
 
 inline constexpr std::uint32_t kSuperBlobMagic = 0xFADE0CC0;
+
+/// The blob around bytes that are no blob themselves, the CMS message for one.
+inline constexpr std::uint32_t kWrapperMagic = 0xFADE0B01;
+
 inline constexpr std::size_t kSuperBlobHeaderSize = 12;
 inline constexpr std::size_t kBlobHeaderSize = 8;
 
@@ -55,5 +62,8 @@ std::vector<Blob> parseSuperBlob(ByteView superblob);
 /// The superblob that stands in `source` at `offset`, in an area of `areaLength` bytes, without its padding.
 /// Only the superblob itself is read. Throws CodeError.
 Data readSuperBlob(const ByteSource& source, std::uint64_t offset, std::uint64_t areaLength);
+
+/// The superblob of these blobs (slot, bytes with header), back to back in this order.
+Data buildSuperBlob(const std::vector<std::pair<std::uint32_t, Data>>& blobs);
 
 }  // namespace pinwell::codesign
