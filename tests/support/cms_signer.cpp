@@ -1,0 +1,261 @@
+#include "support/cms_signer.h"
+
+#include <openssl/bio.h>
+#include <openssl/cms.h>
+#include <openssl/evp.h>
+#include <openssl/rsa.h>
+#include <openssl/ts.h>
+#include <openssl/x509.h>
+
+#include <memory>
+#include <stdexcept>
+
+#include "foundation/byte_writer.h"
+#include "support/code_directory_builder.h"
+
+namespace pinwell::test {
+
+namespace {
+
+template <auto free>
+struct Deleter {
+    template <class T>
+    void operator()(T* object) const noexcept {
+        free(object);
+    }
+};
+using Key = std::unique_ptr<EVP_PKEY, Deleter<EVP_PKEY_free>>;
+using Certificate = std::unique_ptr<X509, Deleter<X509_free>>;
+using Message = std::unique_ptr<CMS_ContentInfo, Deleter<CMS_ContentInfo_free>>;
+using Bio = std::unique_ptr<BIO, Deleter<BIO_free_all>>;
+using TstInfo = std::unique_ptr<TS_TST_INFO, Deleter<TS_TST_INFO_free>>;
+using Imprint = std::unique_ptr<TS_MSG_IMPRINT, Deleter<TS_MSG_IMPRINT_free>>;
+using Algorithm = std::unique_ptr<X509_ALGOR, Deleter<X509_ALGOR_free>>;
+using Integer = std::unique_ptr<ASN1_INTEGER, Deleter<ASN1_INTEGER_free>>;
+using Time = std::unique_ptr<ASN1_GENERALIZEDTIME, Deleter<ASN1_GENERALIZEDTIME_free>>;
+using Object = std::unique_ptr<ASN1_OBJECT, Deleter<ASN1_OBJECT_free>>;
+
+void require(bool done, const char* what) {
+    if (!done) throw std::runtime_error(std::string("cannot make a test signature: ") + what);
+}
+
+struct Identity {
+    Key key;
+    Certificate certificate;
+};
+
+Identity makeIdentity(TestKey kind) {
+    Identity identity;
+    identity.key.reset(kind == TestKey::ecP256 ? EVP_EC_gen("P-256") : EVP_RSA_gen(2048));
+    require(identity.key != nullptr, "key");
+    identity.certificate.reset(X509_new());
+    X509* certificate = identity.certificate.get();
+    require(certificate != nullptr && X509_set_version(certificate, 2) == 1, "certificate");
+    ASN1_INTEGER_set(X509_get_serialNumber(certificate), 1);
+    // Already expired: dates are nothing that a reader of code signatures may ask about.
+    ASN1_TIME_set_string_X509(X509_getm_notBefore(certificate), "20200101000000Z");
+    ASN1_TIME_set_string_X509(X509_getm_notAfter(certificate), "20200102000000Z");
+    X509_NAME* name = X509_get_subject_name(certificate);
+    const unsigned char text[] = "Test signer";
+    X509_NAME_add_entry_by_txt(name, "CN", MBSTRING_ASC, text, -1, -1, 0);
+    X509_set_issuer_name(certificate, name);
+    X509_set_pubkey(certificate, identity.key.get());
+    require(X509_sign(certificate, identity.key.get(), EVP_sha256()) > 0, "certificate signature");
+    return identity;
+}
+
+const Identity& identityWith(TestKey kind) {
+    static const Identity ec = makeIdentity(TestKey::ecP256);
+    static const Identity rsa = makeIdentity(TestKey::rsa2048);
+    return kind == TestKey::ecP256 ? ec : rsa;
+}
+
+Bio reader(ByteView bytes) {
+    return Bio(BIO_new_mem_buf(bytes.data(), static_cast<int>(bytes.size())));
+}
+
+ByteView viewOf(const ASN1_STRING* string) {
+    const auto length = static_cast<std::size_t>(ASN1_STRING_length(string));
+    return std::as_bytes(std::span<const unsigned char>(ASN1_STRING_get0_data(string), length));
+}
+
+template <class T>
+Data encoded(const T* object, int (*encode)(const T*, unsigned char**)) {
+    unsigned char* bytes = nullptr;
+    const int length = encode(object, &bytes);
+    require(length > 0, "encoding");
+    const auto view = std::as_bytes(std::span<const unsigned char>(bytes, static_cast<std::size_t>(length)));
+    Data data = foundation::toData(view);
+    OPENSSL_free(bytes);
+    return data;
+}
+
+CMS_SignerInfo* signerOf(const Message& message) {
+    return sk_CMS_SignerInfo_value(CMS_get0_SignerInfos(message.get()), 0);
+}
+
+/// One signer's message over `content`; `flags` of CMS_sign.
+Message signMessage(const Identity& identity, int contentType, ByteView content, unsigned flags) {
+    flags |= CMS_BINARY;
+    Message message(CMS_sign(nullptr, nullptr, nullptr, nullptr, flags | CMS_PARTIAL));
+    require(message != nullptr, "message");
+    Object type(OBJ_dup(OBJ_nid2obj(contentType)));
+    require(CMS_set1_eContentType(message.get(), type.get()) == 1, "content type");
+    require(
+        CMS_add1_signer(message.get(), identity.certificate.get(), identity.key.get(), EVP_sha256(), flags),
+        "signer");
+    require(CMS_final(message.get(), reader(content).get(), nullptr, flags) == 1, "signature");
+    return message;
+}
+
+void breakSignature(const Message& message) {
+    ASN1_OCTET_STRING* value = CMS_SignerInfo_get0_signature(signerOf(message));
+    Data bytes = foundation::toData(viewOf(value));
+    bytes.back() ^= std::byte{1};
+    ASN1_OCTET_STRING_set(value, static_cast<const unsigned char*>(static_cast<const void*>(bytes.data())),
+                          static_cast<int>(bytes.size()));
+}
+
+/// The same element with indefinite lengths in its outer `levels` constructed levels. The input is DER of our
+/// own.
+Data withIndefiniteLengths(ByteView der, int levels) {
+    foundation::ByteWriter writer;
+    while (!der.empty()) {
+        const auto tag = std::to_integer<std::uint8_t>(der[0]);
+        const auto first = std::to_integer<std::size_t>(der[1]);
+        std::size_t length = first < 0x80 ? first : 0;
+        const std::size_t more = first < 0x80 ? 0 : first & 0x7FU;
+        for (std::size_t i = 0; i < more; ++i)
+            length = length << 8U | std::to_integer<std::size_t>(der[2 + i]);
+        const std::size_t header = 2 + more;
+        if ((tag & 0x20U) != 0 && levels > 0) {
+            writer.u8(tag)
+                .u8(0x80)
+                .bytes(withIndefiniteLengths(der.subspan(header, length), levels - 1))
+                .be16(0);
+        } else {
+            writer.bytes(der.first(header + length));
+        }
+        der = der.subspan(header + length);
+    }
+    return writer.data();
+}
+
+}  // namespace
+
+TimestampBuilder& TimestampBuilder::time(std::string value) {
+    time_ = std::move(value);
+    return *this;
+}
+
+TimestampBuilder& TimestampBuilder::imprintOf(Data bytes) {
+    imprinted_ = std::move(bytes);
+    return *this;
+}
+
+TimestampBuilder& TimestampBuilder::imprintDigest(std::uint8_t type) {
+    imprintDigest_ = type;
+    return *this;
+}
+
+TimestampBuilder& TimestampBuilder::brokenSignature() {
+    broken_ = true;
+    return *this;
+}
+
+TimestampBuilder& TimestampBuilder::withoutCertificate() {
+    certificate_ = false;
+    return *this;
+}
+
+TimestampBuilder& TimestampBuilder::asPlainData() {
+    plainData_ = true;
+    return *this;
+}
+
+Data TimestampBuilder::build(ByteView signatureValue) const {
+    const Data digest = codeDigest(imprintDigest_, imprinted_ ? ByteView(*imprinted_) : signatureValue);
+    Data octets = digest;
+    const Algorithm algorithm(X509_ALGOR_new());
+    X509_ALGOR_set_md(algorithm.get(), imprintDigest_ == 4 ? EVP_sha384() : EVP_sha256());
+    const Imprint imprint(TS_MSG_IMPRINT_new());
+    TS_MSG_IMPRINT_set_algo(imprint.get(), algorithm.get());
+    TS_MSG_IMPRINT_set_msg(imprint.get(), static_cast<unsigned char*>(static_cast<void*>(octets.data())),
+                           static_cast<int>(octets.size()));
+
+    const TstInfo info(TS_TST_INFO_new());
+    const Object policy(OBJ_txt2obj("1.2.3.4", 1));
+    const Integer serial(ASN1_INTEGER_new());
+    ASN1_INTEGER_set(serial.get(), 7);
+    const Time time(ASN1_GENERALIZEDTIME_new());
+    ASN1_STRING_set(time.get(), time_.data(), static_cast<int>(time_.size()));
+    require(TS_TST_INFO_set_version(info.get(), 1) == 1 &&
+                TS_TST_INFO_set_policy_id(info.get(), policy.get()) == 1 &&
+                TS_TST_INFO_set_msg_imprint(info.get(), imprint.get()) == 1 &&
+                TS_TST_INFO_set_serial(info.get(), serial.get()) == 1 &&
+                TS_TST_INFO_set_time(info.get(), time.get()) == 1,
+            "time stamp");
+
+    const Message token =
+        signMessage(identityWith(TestKey::rsa2048), plainData_ ? NID_pkcs7_data : NID_id_smime_ct_TSTInfo,
+                    encoded<TS_TST_INFO>(info.get(), i2d_TS_TST_INFO), certificate_ ? 0 : CMS_NOCERTS);
+    if (broken_) breakSignature(token);
+    return encoded<CMS_ContentInfo>(token.get(), i2d_CMS_ContentInfo);
+}
+
+CmsBuilder::CmsBuilder(Data content) : content_(std::move(content)) {}
+
+CmsBuilder& CmsBuilder::key(TestKey value) {
+    key_ = value;
+    return *this;
+}
+
+CmsBuilder& CmsBuilder::ber() {
+    ber_ = true;
+    return *this;
+}
+
+CmsBuilder& CmsBuilder::withoutCertificate() {
+    certificate_ = false;
+    return *this;
+}
+
+CmsBuilder& CmsBuilder::attached() {
+    attached_ = true;
+    return *this;
+}
+
+CmsBuilder& CmsBuilder::withoutSignedAttributes() {
+    signedAttributes_ = false;
+    return *this;
+}
+
+CmsBuilder& CmsBuilder::brokenSignature() {
+    broken_ = true;
+    return *this;
+}
+
+CmsBuilder& CmsBuilder::timestamp(TimestampBuilder token) {
+    timestamps_.push_back(std::move(token));
+    return *this;
+}
+
+Data CmsBuilder::build() const {
+    unsigned flags = 0;
+    if (!attached_) flags |= CMS_DETACHED;
+    if (!certificate_) flags |= CMS_NOCERTS;
+    if (!signedAttributes_) flags |= CMS_NOATTR;
+    const Message message = signMessage(identityWith(key_), NID_pkcs7_data, content_, flags);
+    CMS_SignerInfo* signer = signerOf(message);
+    for (const TimestampBuilder& timestamp : timestamps_) {
+        const Data token = timestamp.build(viewOf(CMS_SignerInfo_get0_signature(signer)));
+        require(CMS_unsigned_add1_attr_by_NID(signer, NID_id_smime_aa_timeStampToken, V_ASN1_SEQUENCE,
+                                              token.data(), static_cast<int>(token.size())) == 1,
+                "time stamp attribute");
+    }
+    if (broken_) breakSignature(message);
+    const Data der = encoded<CMS_ContentInfo>(message.get(), i2d_CMS_ContentInfo);
+    return ber_ ? withIndefiniteLengths(der, 4) : der;
+}
+
+}  // namespace pinwell::test

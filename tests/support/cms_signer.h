@@ -1,0 +1,90 @@
+// CMS messages as a signer of code makes them, and time-stamp tokens as a time-stamp authority does, each
+// with the one fault a test wants. Keys are made once a process and key kind, certificates are self-signed:
+// whoever reads these messages must not ask whom they come from.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "foundation/bytes.h"
+
+namespace pinwell::test {
+
+using foundation::ByteView;
+using foundation::Data;
+
+enum class TestKey { ecP256, rsa2048 };
+
+/// A time-stamp token (RFC 3161) over a signature value.
+class TimestampBuilder {
+  public:
+    /// GeneralizedTime; by default 2026-11-20 19:55:00 UTC, which is 1795204500 seconds.
+    TimestampBuilder& time(std::string value);
+
+    /// The imprint is of these bytes instead of the signature value.
+    TimestampBuilder& imprintOf(Data bytes);
+
+    /// Another SHA-2 digest for the imprint (2: SHA-256, 4: SHA-384).
+    TimestampBuilder& imprintDigest(std::uint8_t type);
+
+    /// One bit of the token's own signature is wrong.
+    TimestampBuilder& brokenSignature();
+
+    TimestampBuilder& withoutCertificate();
+
+    /// The content is called plain data instead of a time stamp.
+    TimestampBuilder& asPlainData();
+
+    /// The token for this signature value, DER.
+    Data build(ByteView signatureValue) const;
+
+  private:
+    std::string time_ = "20261120195500Z";
+    std::optional<Data> imprinted_;
+    std::uint8_t imprintDigest_ = 2;
+    bool broken_ = false;
+    bool certificate_ = true;
+    bool plainData_ = false;
+};
+
+/// A detached SignedData with one signer, his certificate inside; DER unless ber() is called.
+class CmsBuilder {
+  public:
+    /// What is signed: the code directory of slot 0.
+    explicit CmsBuilder(Data content);
+
+    CmsBuilder& key(TestKey value);
+
+    /// Indefinite lengths in the outer four levels.
+    CmsBuilder& ber();
+
+    CmsBuilder& withoutCertificate();
+
+    /// The content travels inside the message.
+    CmsBuilder& attached();
+
+    /// No signed attributes: the signature is over the content itself.
+    CmsBuilder& withoutSignedAttributes();
+
+    /// One bit of the signature value is wrong.
+    CmsBuilder& brokenSignature();
+
+    /// One more time-stamp token among the unsigned attributes.
+    CmsBuilder& timestamp(TimestampBuilder token);
+
+    Data build() const;
+
+  private:
+    Data content_;
+    TestKey key_ = TestKey::ecP256;
+    bool ber_ = false;
+    bool certificate_ = true;
+    bool attached_ = false;
+    bool signedAttributes_ = true;
+    bool broken_ = false;
+    std::vector<TimestampBuilder> timestamps_;
+};
+
+}  // namespace pinwell::test
