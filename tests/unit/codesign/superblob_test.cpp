@@ -1,0 +1,181 @@
+#include "codesign/superblob.h"
+
+#include <gtest/gtest.h>
+
+#include "codesign/code_error.h"
+#include "foundation/byte_reader.h"
+#include "foundation/byte_writer.h"
+#include "support/code_directory_builder.h"
+
+namespace pinwell::test {
+namespace {
+
+using codesign::CodeError;
+using codesign::MemorySource;
+using codesign::parseSuperBlob;
+using codesign::readSuperBlob;
+using foundation::ShortRead;
+
+/// Three blobs, in the slots 0, 2 and 7.
+SuperBlobBuilder threeBlobs() {
+    return SuperBlobBuilder()
+        .blob(0, makeBlob(0xA0, Data(16, std::byte{1})))
+        .blob(2, makeBlob(0xA2, Data(4, std::byte{2})))
+        .blob(7, makeBlob(0xA7, Data(1, std::byte{3})));
+}
+
+TEST(SuperBlob, GivesItsBlobsInIndexOrder) {
+    const Data bytes = threeBlobs().build();
+    const auto blobs = parseSuperBlob(bytes);
+    ASSERT_EQ(blobs.size(), 3U);
+    EXPECT_EQ(blobs[0].slot, 0U);
+    EXPECT_EQ(blobs[1].slot, 2U);
+    EXPECT_EQ(blobs[1].magic, 0xA2U);
+    EXPECT_EQ(foundation::toData(blobs[1].bytes), makeBlob(0xA2, Data(4, std::byte{2})));
+    EXPECT_EQ(blobs[2].slot, 7U);
+}
+
+TEST(SuperBlob, MayBeEmpty) {
+    EXPECT_TRUE(parseSuperBlob(SuperBlobBuilder().build()).empty());
+}
+
+TEST(SuperBlob, MayListItsBlobsOutOfOrder) {
+    const Data bytes = threeBlobs().reverseIndex().build();
+    const auto blobs = parseSuperBlob(bytes);
+    ASSERT_EQ(blobs.size(), 3U);
+    EXPECT_EQ(blobs[0].slot, 7U);
+    EXPECT_EQ(blobs[0].magic, 0xA7U);
+}
+
+TEST(SuperBlob, MayHaveGapsBetweenItsBlobs) {
+    const Data bytes = SuperBlobBuilder()
+                           .gap(5)
+                           .blob(0, makeBlob(0xA0, Data(16)))
+                           .gap(100)
+                           .blob(2, makeBlob(0xA2, Data(4)))
+                           .build();
+    EXPECT_EQ(parseSuperBlob(bytes).size(), 2U);
+}
+
+TEST(SuperBlob, EndsWhereItsOwnLengthSays) {
+    Data bytes = threeBlobs().build();
+    bytes.resize(bytes.size() + 1000, std::byte{0xFF});
+    EXPECT_EQ(parseSuperBlob(bytes).size(), 3U);
+}
+
+TEST(SuperBlob, RefusesAnotherMagic) {
+    EXPECT_THROW(parseSuperBlob(threeBlobs().magic(0xFADE0CC1).build()), CodeError);
+}
+
+TEST(SuperBlob, RefusesALengthBelowItsHeader) {
+    EXPECT_THROW(parseSuperBlob(threeBlobs().length(11).build()), CodeError);
+}
+
+TEST(SuperBlob, RefusesALengthBeyondTheBytes) {
+    const auto size = static_cast<std::uint32_t>(threeBlobs().build().size());
+    EXPECT_THROW(parseSuperBlob(threeBlobs().length(size + 1).build()), ShortRead);
+}
+
+TEST(SuperBlob, RefusesALengthThatCutsABlob) {
+    const auto size = static_cast<std::uint32_t>(threeBlobs().build().size());
+    EXPECT_THROW(parseSuperBlob(threeBlobs().length(size - 1).build()), ShortRead);
+}
+
+TEST(SuperBlob, RefusesALengthBeyondTheLimit) {
+    EXPECT_THROW(parseSuperBlob(threeBlobs().length(codesign::kMaximumSuperBlobLength + 1).build()),
+                 CodeError);
+}
+
+TEST(SuperBlob, RefusesACountBeyondTheBytes) {
+    EXPECT_THROW(parseSuperBlob(SuperBlobBuilder().count(1).build()), ShortRead);
+}
+
+TEST(SuperBlob, RefusesACountBeyondTheLimit) {
+    EXPECT_THROW(parseSuperBlob(threeBlobs().count(codesign::kMaximumBlobCount + 1).build()), CodeError);
+    EXPECT_THROW(parseSuperBlob(threeBlobs().count(0xFFFFFFFF).build()), CodeError);
+}
+
+TEST(SuperBlob, RefusesABlobThatBeginsBeyondTheEnd) {
+    EXPECT_THROW(parseSuperBlob(threeBlobs().offsetOf(7, 0xFFFFFFFF).build()), ShortRead);
+}
+
+TEST(SuperBlob, RefusesABlobWhoseHeaderIsCut) {
+    const auto size = static_cast<std::uint32_t>(threeBlobs().build().size());
+    EXPECT_THROW(parseSuperBlob(threeBlobs().offsetOf(7, size - 7).build()), ShortRead);
+}
+
+TEST(SuperBlob, RefusesABlobShorterThanItsHeader) {
+    const Data blob = foundation::ByteWriter().be32(0xA0).be32(7).data();
+    EXPECT_THROW(parseSuperBlob(SuperBlobBuilder().blob(0, blob).build()), CodeError);
+}
+
+TEST(SuperBlob, RefusesABlobLongerThanTheSuperBlob) {
+    const Data blob = foundation::ByteWriter().be32(0xA0).be32(9).data();
+    EXPECT_THROW(parseSuperBlob(SuperBlobBuilder().blob(0, blob).build()), ShortRead);
+}
+
+TEST(SuperBlob, RefusesTwoEntriesForOneSlot) {
+    const auto builder = SuperBlobBuilder().blob(2, makeBlob(0xA0, {})).blob(2, makeBlob(0xA1, {}));
+    EXPECT_THROW(parseSuperBlob(builder.build()), CodeError);
+}
+
+TEST(SuperBlob, RefusesTwoSlotsOnOneBlob) {
+    const std::uint32_t first = 12 + 3 * 8;
+    EXPECT_THROW(parseSuperBlob(threeBlobs().offsetOf(2, first).build()), CodeError);
+}
+
+TEST(SuperBlob, RefusesABlobInsideAnother) {
+    const Data inner = makeBlob(0xA2, Data(8));
+    auto builder = SuperBlobBuilder().blob(0, makeBlob(0xA0, inner)).blob(2, makeBlob(0xA2, {}));
+    EXPECT_THROW(parseSuperBlob(builder.offsetOf(2, 12 + 2 * 8 + 8).build()), CodeError);
+}
+
+TEST(SuperBlob, RefusesABlobThatReachesIntoTheIndex) {
+    // The count (1) and the slot (8) of the index read as the blob's magic and length.
+    EXPECT_THROW(parseSuperBlob(SuperBlobBuilder().blob(8, makeBlob(0xA0, {})).offsetOf(8, 8).build()),
+                 CodeError);
+}
+
+TEST(SuperBlob, EndsCleanlyWhereverItIsCut) {
+    const Data whole = threeBlobs().build();
+    for (std::size_t length = 0; length < whole.size(); ++length) {
+        EXPECT_ANY_THROW(parseSuperBlob(ByteView(whole).first(length))) << length;
+    }
+}
+
+TEST(SuperBlobInAFile, IsReadWithoutThePaddingOfItsArea) {
+    const Data superblob = threeBlobs().build();
+    Data file(100);
+    foundation::append(file, superblob);
+    file.resize(file.size() + 500, std::byte{0xFF});
+    EXPECT_EQ(readSuperBlob(MemorySource(file), 100, superblob.size() + 500), superblob);
+}
+
+TEST(SuperBlobInAFile, RefusesAnAreaShorterThanItself) {
+    const Data superblob = threeBlobs().build();
+    EXPECT_THROW(readSuperBlob(MemorySource(superblob), 0, superblob.size() - 1), CodeError);
+    EXPECT_THROW(readSuperBlob(MemorySource(superblob), 0, 11), CodeError);
+}
+
+TEST(SuperBlobInAFile, RefusesAnAreaBeyondTheFile) {
+    EXPECT_THROW(readSuperBlob(MemorySource(Data(100)), 101, 12), CodeError);
+    EXPECT_THROW(readSuperBlob(MemorySource(Data(100)), 0xFFFFFFFFFFFFFFFF, 12), CodeError);
+}
+
+TEST(SuperBlobInAFile, IsNotReadWhenItClaimsToBeTooLong) {
+    Data file = threeBlobs().length(codesign::kMaximumSuperBlobLength + 1).build();
+    file.resize(codesign::kMaximumSuperBlobLength + 4096);
+    const MemorySource source(std::move(file));
+    EXPECT_THROW(readSuperBlob(source, 0, source.size()), CodeError);
+}
+
+TEST(BuiltSuperBlob, IsReadBack) {
+    const Data expected = threeBlobs().build();
+    EXPECT_EQ(codesign::buildSuperBlob({{0, makeBlob(0xA0, Data(16, std::byte{1}))},
+                                        {2, makeBlob(0xA2, Data(4, std::byte{2}))},
+                                        {7, makeBlob(0xA7, Data(1, std::byte{3}))}}),
+              expected);
+}
+
+}  // namespace
+}  // namespace pinwell::test
