@@ -46,11 +46,11 @@ class CodeSigningTest : public ::testing::Test {
     }
 
     Answer askAbout(const Data& contents) {
-        writeFile(directory / "sample", contents);
-        return ask(directory / "sample");
+        writeFile(scratch / "sample", contents);
+        return ask(scratch / "sample");
     }
 
-    TemporaryDirectory directory;
+    TemporaryDirectory scratch;
     codesign::FileCodeSigningService service{sampleExecutable};
 };
 

@@ -1,0 +1,223 @@
+#include "codesign/adhoc_signer.h"
+
+#include <gtest/gtest.h>
+
+#include <span>
+
+#include "disk_image_sample.h"
+#include "foundation/byte_writer.h"
+#include "service_fixture.h"
+
+namespace pinwell::test {
+namespace {
+
+using codesign::kSuccess;
+using codesign::layOutOpaqueCodeDirectory;
+using codesign::OpaqueSignature;
+using foundation::ByteWriter;
+
+/// SHA-256 of FADE0C01 0000000C 00000000.
+const Data kEmptyRequirementsDigest = codeDigest(2, emptyRequirements());
+
+/// A code directory of an ordinary file, written down field by field.
+Data expectedForFile(std::uint32_t limit, const Data& contentDigest) {
+    return ByteWriter()
+        .be32(0xFADE0C02)
+        .be32(48 + 6 + 3 * 32)  // length
+        .be32(0x20100)
+        .be32(2)                // flags
+        .be32(48 + 6 + 2 * 32)  // hash offset
+        .be32(48)               // identifier offset
+        .be32(2)                // special slots
+        .be32(1)                // code slots
+        .be32(limit)
+        .u8(32)
+        .u8(2)
+        .u8(0)
+        .u8(0)
+        .be32(0)
+        .be32(0)  // scatter offset
+        .text("ADHOC")
+        .u8(0)
+        .bytes(kEmptyRequirementsDigest)
+        .zeros(32)
+        .bytes(contentDigest)
+        .data();
+}
+
+TEST(OpaqueCodeDirectory, OfAFileIsLaidOutByteForByte) {
+    const Data content(32, std::byte{0xC0});
+    EXPECT_EQ(layOutOpaqueCodeDirectory({"ADHOC", 0x12345678, std::nullopt, content}),
+              expectedForFile(0x12345678, content));
+}
+
+TEST(OpaqueCodeDirectory, OfADiskImageHasSixSpecialSlots) {
+    const Data content(32, std::byte{0xC0});
+    const Data trailer(32, std::byte{0x6B});
+    const Data expected = ByteWriter()
+                              .be32(0xFADE0C02)
+                              .be32(48 + 6 + 7 * 32)
+                              .be32(0x20100)
+                              .be32(2)
+                              .be32(48 + 6 + 6 * 32)
+                              .be32(48)
+                              .be32(6)
+                              .be32(1)
+                              .be32(4096)
+                              .u8(32)
+                              .u8(2)
+                              .be16(0)
+                              .be64(0)
+                              .text("ADHOC")
+                              .u8(0)
+                              .bytes(trailer)
+                              .zeros(3 * 32)
+                              .bytes(kEmptyRequirementsDigest)
+                              .zeros(32)
+                              .bytes(content)
+                              .data();
+    EXPECT_EQ(layOutOpaqueCodeDirectory({"ADHOC", 4096, trailer, content}), expected);
+}
+
+TEST(OpaqueCodeDirectory, OfMoreThan32BitsHasTheLongForm) {
+    const Data content(32, std::byte{0xC0});
+    const Data expected = ByteWriter()
+                              .be32(0xFADE0C02)
+                              .be32(64 + 6 + 3 * 32)
+                              .be32(0x20300)
+                              .be32(2)
+                              .be32(64 + 6 + 2 * 32)
+                              .be32(64)
+                              .be32(2)
+                              .be32(1)
+                              .be32(0xFFFFFFFF)
+                              .u8(32)
+                              .u8(2)
+                              .be16(0)
+                              .be64(0)  // spare and scatter offset
+                              .be64(0)  // team offset and spare
+                              .be64(0x100000000)
+                              .text("ADHOC")
+                              .u8(0)
+                              .bytes(kEmptyRequirementsDigest)
+                              .zeros(32)
+                              .bytes(content)
+                              .data();
+    EXPECT_EQ(layOutOpaqueCodeDirectory({"ADHOC", 0x100000000, std::nullopt, content}), expected);
+}
+
+TEST(OpaqueCodeDirectory, KeepsTheShortFormUpToTheLast32BitLimit) {
+    const Data content(32, std::byte{0xC0});
+    EXPECT_EQ(layOutOpaqueCodeDirectory({"ADHOC", 0xFFFFFFFF, std::nullopt, content}),
+              expectedForFile(0xFFFFFFFF, content));
+}
+
+class AdHocSigning : public CodeSigningTest {
+  protected:
+    /// The information about the file once it was signed and given its detached signature, as a caller does
+    /// it.
+    codesign::SigningInformation sign(const Data& contents) {
+        writeFile(scratch / "image", contents);
+        std::shared_ptr<codesign::StaticCode> code;
+        EXPECT_EQ(service.createStaticCode(scratch.url("image"), 0, code), kSuccess);
+        codesign::SignerParameters parameters;
+        parameters.identifier = "ADHOC";
+        parameters.detachedSignature = std::make_shared<Data>();
+        std::shared_ptr<codesign::Signer> signer;
+        EXPECT_EQ(service.createSigner(parameters, codesign::kSignOpaque, signer), kSuccess);
+        EXPECT_EQ(service.addSignature(*signer, *code, 0), kSuccess);
+        EXPECT_EQ(service.setDetachedSignature(*code, *parameters.detachedSignature, 0), kSuccess);
+        EXPECT_EQ(service.checkValidity(*code, kValidityFlags), kSuccess);
+        std::optional<codesign::SigningInformation> information;
+        EXPECT_EQ(service.copySigningInformation(*code, codesign::kSigningInformation, information),
+                  kSuccess);
+        EXPECT_EQ(readFile(scratch / "image"), foundation::toString(contents));
+        return information.value_or(codesign::SigningInformation());
+    }
+};
+
+TEST_F(AdHocSigning, OfAFileHasTheHashOfItsCodeDirectory) {
+    // More than one piece of reading.
+    const Data contents(600'001, std::byte{0x42});
+    const Data hash = codeHashOf(2, expectedForFile(600'001, codeDigest(2, contents)));
+    const codesign::SigningInformation information = sign(contents);
+    EXPECT_EQ(information.cdHashes, std::vector<Data>{hash});
+    EXPECT_EQ(information.digestAlgorithms, std::vector<std::uint32_t>{2});
+    EXPECT_EQ(information.unique, hash);
+    EXPECT_EQ(information.identifier, "ADHOC");
+    EXPECT_EQ(information.flags, 2U);
+}
+
+TEST_F(AdHocSigning, OfADiskImageCoversWhatStandsBeforeItsTrailer) {
+    const Data content(1000, std::byte{0x42});
+    const Data codeDirectory =
+        layOutOpaqueCodeDirectory({"ADHOC", 1000, codeDigest(2, trailerWith(0, 0)), codeDigest(2, content)});
+    EXPECT_EQ(sign(diskImage(content, {})).unique, codeHashOf(2, codeDirectory));
+}
+
+TEST_F(AdHocSigning, IsTheSameBeforeAndAfterATicketIsStapled) {
+    const Data content(1000, std::byte{0x42});
+    const Data stapled = SuperBlobBuilder().blob(0x10002, makeBlob(0xFADE0B01, Data(300))).build();
+    const Data longer = SuperBlobBuilder().blob(0x10002, makeBlob(0xFADE0B01, Data(900))).build();
+    const auto unsignedHash = sign(diskImage(content, {})).unique;
+    EXPECT_EQ(sign(diskImage(content, stapled)).unique, unsignedHash);
+    EXPECT_EQ(sign(diskImage(content, longer)).unique, unsignedHash);
+}
+
+TEST_F(AdHocSigning, CoversASignatureAreaThatDoesNotEndAtTheTrailer) {
+    const Data content(1000, std::byte{0x42});
+    const Data trailer = trailerWith(900, 99);
+    Data file = content;
+    foundation::append(file, trailer);
+    const Data codeDirectory =
+        layOutOpaqueCodeDirectory({"ADHOC", 1000, codeDigest(2, trailerWith(0, 0)), codeDigest(2, content)});
+    EXPECT_EQ(sign(file).unique, codeHashOf(2, codeDirectory));
+}
+
+TEST_F(AdHocSigning, OfATrailerAloneCoversNoBytes) {
+    const Data codeDirectory =
+        layOutOpaqueCodeDirectory({"ADHOC", 0, codeDigest(2, trailerWith(0, 0)), codeDigest(2, {})});
+    EXPECT_EQ(sign(diskImage({}, {})).unique, codeHashOf(2, codeDirectory));
+}
+
+TEST_F(AdHocSigning, TakesAnExecutableImageAsOpaqueData) {
+    const Data image = ExecutableImageBuilder().build();
+    const auto size = static_cast<std::uint32_t>(image.size());
+    EXPECT_EQ(sign(image).unique, codeHashOf(2, expectedForFile(size, codeDigest(2, image))));
+}
+
+TEST_F(AdHocSigning, GivesOtherBytesAnotherHash) {
+    EXPECT_NE(sign(diskImage(Data(1000), {})).unique, sign(diskImage(Data(1001), {})).unique);
+}
+
+TEST_F(AdHocSigning, NeedsItsParameters) {
+    std::shared_ptr<codesign::Signer> signer;
+    const codesign::SignerParameters good = {"ADHOC", std::make_shared<Data>(), codesign::DigestType::sha256};
+    codesign::SignerParameters parameters = good;
+    EXPECT_EQ(service.createSigner(parameters, 0, signer), codesign::kUnimplemented);
+    parameters.digestAlgorithm = codesign::DigestType::sha1;
+    EXPECT_EQ(service.createSigner(parameters, codesign::kSignOpaque, signer), codesign::kUnimplemented);
+    parameters = good;
+    parameters.identifier = "";
+    EXPECT_EQ(service.createSigner(parameters, codesign::kSignOpaque, signer), codesign::kParameterError);
+    parameters.identifier = std::string("AD\0HOC", 6);
+    EXPECT_EQ(service.createSigner(parameters, codesign::kSignOpaque, signer), codesign::kParameterError);
+    parameters = good;
+    parameters.detachedSignature = nullptr;
+    EXPECT_EQ(service.createSigner(parameters, codesign::kSignOpaque, signer), codesign::kParameterError);
+    EXPECT_EQ(signer, nullptr);
+}
+
+TEST_F(AdHocSigning, RefusesADetachedSignatureThatIsNone) {
+    writeFile(scratch / "image", "some bytes");
+    std::shared_ptr<codesign::StaticCode> code;
+    ASSERT_EQ(service.createStaticCode(scratch.url("image"), 0, code), kSuccess);
+    EXPECT_EQ(service.setDetachedSignature(*code, {}, 0), codesign::kInvalidSignature);
+    EXPECT_EQ(service.setDetachedSignature(*code, Data(100), 0), codesign::kInvalidSignature);
+    EXPECT_EQ(service.setDetachedSignature(*code, SuperBlobBuilder().build(), 0),
+              codesign::kInvalidSignature);
+    EXPECT_EQ(service.checkValidity(*code, kValidityFlags), codesign::kUnsigned);
+}
+
+}  // namespace
+}  // namespace pinwell::test
