@@ -1,11 +1,15 @@
 // Files as the tool handles them: questions about an item, safe copies and swaps, and file handles.
 //
 // All calls block and may be made from any thread; one handle serves one thread at a time. Errors are of
-// kPOSIXErrorDomain and name the path. Nothing is ever written through a symbolic link in the last path component.
+// kPOSIXErrorDomain and name the path; a URL that is no file's, or a path with a zero byte in it, is EINVAL.
+// Nothing is ever written through a symbolic link in the last path component. Every file is opened
+// close-on-exec.
 #pragma once
 
+#include <cstdint>
 #include <functional>
 #include <memory>
+#include <optional>
 #include <stdexcept>
 #include <string>
 
@@ -48,22 +52,25 @@ struct ResourceProperties {
     std::string typeIdentifier;
     std::string localizedTypeDescription;
 
-    /// All six under their property names, for the verbose dump.
+    /// All six under their names as above, for the verbose dump.
     Dictionary dictionary() const;
 };
 
-/// A file handle's failure. `what()` is the reason text: what was tried, on which file, and the system's word.
+/// A file handle's failure. `what()` is the reason text: what was tried, on which file, and the system's word
+/// for why not.
 class FileHandleError : public std::runtime_error {
   public:
     using std::runtime_error::runtime_error;
 };
 
-/// An open file. The operations throw FileHandleError; the destructor closes and swallows what goes wrong then.
+/// An open regular file. The operations throw FileHandleError; the destructor closes, and swallows what goes
+/// wrong then.
 class FileHandle {
   public:
     virtual ~FileHandle() = default;
 
-    /// Both answer the new position, in bytes from the start.
+    /// Both answer the new position, in bytes from the start. A position past the end is one; what is written
+    /// there leaves a hole.
     virtual std::uint64_t seekToEnd() = 0;
     virtual std::uint64_t seek(std::uint64_t position) = 0;
     virtual std::uint64_t position() = 0;
@@ -74,6 +81,7 @@ class FileHandle {
     /// Writes all of `bytes`.
     virtual void write(ByteView bytes) = 0;
 
+    /// Cuts the file, or extends it with zeroes. The position stays where it is.
     virtual void truncate(std::uint64_t length) = 0;
 
     /// Returns when the file's data and metadata are on stable storage.
@@ -99,45 +107,57 @@ class FileManager {
     /// Main executable of the directory, opened as a bundle.
     virtual std::optional<URL> mainExecutableOfBundle(const URL& directory) = 0;
 
-    /// Whether the file system can clone that very file (reflink), found by asking it. Leaves nothing behind.
+    /// Whether the file system can clone that very file (reflink), found by asking it with a clone into a
+    /// file without a name in the same directory. Leaves nothing behind; an error is a question that could
+    /// not be put.
     virtual Result<bool> volumeSupportsCloning(const URL& item) = 0;
 
-    /// A fresh directory of mode 0700 beside `item`.
+    /// A fresh directory of mode 0700 beside `item`, named `.pinwell-replacement-` and six random characters.
     virtual Result<URL> createReplacementDirectory(const URL& item) = 0;
 
-    /// A copy at `destination`, which must not exist: a clone where that can be; carries mode, owner where
-    /// permitted, extended attributes, access control list and times. A failed copy leaves nothing there.
-    /// Regular files only (EINVAL, or EISDIR).
+    /// A copy at `destination`, which must not exist (EEXIST): a clone where that can be; carries mode, owner
+    /// where permitted, extended attributes, access control list and times, as far as the volume can keep
+    /// them. A failed copy leaves nothing there. Regular files only (EINVAL, EISDIR, ELOOP). Not flushed to
+    /// stable storage.
     virtual Result<void> copyItem(const URL& source, const URL& destination) = 0;
 
-    /// A file, a link, or a directory with all that is in it.
+    /// Removes a file, a link, or a directory with all that is in it; follows no link. What an error names is
+    /// still there, and so may be more.
     virtual Result<void> removeItem(const URL& item) = 0;
 
-    /// Puts `replacement` in the place of `original` with one rename, after carrying over the original's metadata,
-    /// durable before it returns. Afterwards the replacement's old path holds nothing, and the replacement
-    /// directory it stood in, when it is one of createReplacementDirectory's, is gone.
+    /// Puts `replacement` in the place of `original` with one rename, durable before it returns, after
+    /// carrying over the original's mode, owner, extended attributes and access control list (not its times:
+    /// the contents are new). Both are regular files, and not the same one. Afterwards the replacement's old
+    /// path holds nothing, and the directory it stood in is gone when it is one of
+    /// createReplacementDirectory's and holds nothing else. An error leaves both files where they were,
+    /// except when it is the directory's flush after the swap that fails.
     virtual Result<void> replaceItem(const URL& original, const URL& replacement) = 0;
 
-    /// Moves the item to the user's trash; answers where it is now.
+    /// Moves the item (a link itself) to the user's freedesktop.org trash, the volume's own where it is not
+    /// the home directory's; answers where it is now. What is beneath the error is the user information's
+    /// underlying error.
     virtual Result<URL> trashItem(const URL& item) = 0;
 
-    /// The whole of a regular file of at most kMaximumWholeFile bytes (EFBIG). Follows no link in the last component
-    /// (ELOOP), never blocks on what is not a regular file (EINVAL, EISDIR).
+    /// The whole of a regular file of at most kMaximumWholeFile bytes (EFBIG). Follows no link in the last
+    /// component (ELOOP), never blocks on what is not a regular file (EINVAL, EISDIR).
     virtual Result<Data> contentsOfFile(const URL& file) = 0;
 
-    /// Writes a file of mode 0600. Atomically: to a file beside it that is then renamed into place, replacing
-    /// whatever non-directory is there. Otherwise plainly: a new file, or an existing regular file overwritten.
+    /// Writes a file of mode 0600. Atomically: to a file beside it that is then flushed and renamed into
+    /// place, replacing whatever non-directory is there; a failure leaves nothing behind. Otherwise plainly:
+    /// a new file, which a failure removes, or an existing regular file overwritten, which a failure leaves
+    /// half written.
     enum class Writing { plain, atomic };
     virtual Result<void> writeFile(ByteView contents, const URL& file, Writing writing) = 0;
 
-    /// Close-on-exec, no link followed in the last component. Opens regular files only; never blocks.
+    /// Regular files only (EINVAL, EISDIR, ELOOP); never blocks on anything else. The file must exist.
     virtual Result<std::unique_ptr<FileHandle>> openForReading(const URL& file) = 0;
     virtual Result<std::unique_ptr<FileHandle>> openForUpdating(const URL& file) = 0;
 
+    /// $TMPDIR when it is an absolute path, else /tmp.
     virtual URL temporaryDirectory() = 0;
 };
 
-/// The file manager of this machine.
+/// The file manager of this machine. `typeNaming` must be callable, from any thread.
 std::unique_ptr<FileManager> makeLocalFileManager(TypeNaming typeNaming);
 
 }  // namespace pinwell::files

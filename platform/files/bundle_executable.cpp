@@ -1,0 +1,13 @@
+#include "files/bundle_executable.h"
+
+#include "foundation/bundle.h"
+
+namespace pinwell::files {
+
+std::optional<URL> mainExecutableIn(const URL& directory) {
+    const auto path = foundation::mainExecutableOfBundle(directory.path());
+    if (!path) return std::nullopt;
+    return URL::fileURLWithPath(*path);
+}
+
+}  // namespace pinwell::files

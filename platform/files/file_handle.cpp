@@ -1,0 +1,77 @@
+#include "files/file_handle.h"
+
+#include <unistd.h>
+
+#include <limits>
+#include <utility>
+
+#include "files/posix.h"
+
+namespace pinwell::files {
+namespace {
+
+class LocalFileHandle final : public FileHandle {
+  public:
+    explicit LocalFileHandle(OpenFile file) : file_(std::move(file)) {}
+
+    std::uint64_t seekToEnd() override { return moveTo(0, SEEK_END); }
+    std::uint64_t seek(std::uint64_t position) override {
+        return moveTo(offset("seek in", position), SEEK_SET);
+    }
+    std::uint64_t position() override { return moveTo(0, SEEK_CUR); }
+
+    Data read(std::uint64_t length) override {
+        auto data = readUpTo(file_, length);
+        if (!data) fail("read", data.error());
+        return std::move(*data);
+    }
+
+    void write(ByteView bytes) override {
+        if (const auto done = writeAll(file_, bytes); !done) fail("write to", done.error());
+    }
+
+    void truncate(std::uint64_t length) override {
+        const off_t size = offset("truncate", length);
+        if (uninterrupted([&] { return ftruncate(file_.number(), size); }) != 0)
+            fail("truncate", lastError(file_.path));
+    }
+
+    void synchronize() override {
+        if (const auto done = flush(file_.number(), file_.path); !done) fail("synchronize", done.error());
+    }
+
+    void close() override {
+        if (!file_.descriptor) return;
+        if (const auto done = closeReporting(file_); !done) fail("close", done.error());
+    }
+
+  private:
+    [[noreturn]] void fail(const char* attempt, const Error& error) const {
+        throw FileHandleError(std::string("Cannot ") + attempt + " " + file_.path + ": " +
+                              error.localizedFailureReason());
+    }
+
+    off_t offset(const char* attempt, std::uint64_t position) const {
+        if (position > static_cast<std::uint64_t>(std::numeric_limits<off_t>::max()))
+            fail(attempt, Error::posix(EOVERFLOW));
+        return static_cast<off_t>(position);
+    }
+
+    std::uint64_t moveTo(off_t distance, int from) {
+        const off_t now = uninterrupted([&] { return lseek(file_.number(), distance, from); });
+        if (now < 0) fail("seek in", lastError(file_.path));
+        return static_cast<std::uint64_t>(now);
+    }
+
+    OpenFile file_;
+};
+
+}  // namespace
+
+Result<std::unique_ptr<FileHandle>> openFileHandle(const std::string& path, int access) {
+    auto file = openRegularFile(path, access);
+    if (!file) return file.error();
+    return std::unique_ptr<FileHandle>(std::make_unique<LocalFileHandle>(std::move(*file)));
+}
+
+}  // namespace pinwell::files

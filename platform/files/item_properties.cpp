@@ -1,0 +1,35 @@
+#include "files/item_properties.h"
+
+#include "files/posix.h"
+
+namespace pinwell::files {
+
+Dictionary ResourceProperties::dictionary() const {
+    return {{"isDirectory", isDirectory},       {"isPackage", isPackage},
+            {"isApplication", isApplication},   {"isSymbolicLink", isSymbolicLink},
+            {"typeIdentifier", typeIdentifier}, {"localizedTypeDescription", localizedTypeDescription}};
+}
+
+Result<ResourceProperties> resourcePropertiesOfItem(const URL& item, const TypeNaming& typeNaming) {
+    const auto status = statusOfItem(item.path());
+    if (!status) return status.error();
+
+    ItemFacts facts;
+    facts.name = item.lastPathComponent();
+    facts.isDirectory = S_ISDIR(status->st_mode);
+    facts.isRegularFile = S_ISREG(status->st_mode);
+    facts.isSymbolicLink = S_ISLNK(status->st_mode);
+    facts.isExecutable = (status->st_mode & (S_IXUSR | S_IXGRP | S_IXOTH)) != 0;
+
+    const ItemType type = typeNaming(facts);
+    return ResourceProperties{facts.isDirectory,    type.isPackage,  type.isApplication,
+                              facts.isSymbolicLink, type.identifier, type.localizedDescription};
+}
+
+Result<bool> itemIsRegularFile(const std::string& path) {
+    const auto status = statusOfItem(path);
+    if (!status) return status.error();
+    return S_ISREG(status->st_mode);
+}
+
+}  // namespace pinwell::files

@@ -1,0 +1,94 @@
+// The system's file calls as this folder uses them: interrupted calls repeated, short ones finished, and no
+// errno lost on the way. For this folder only.
+#pragma once
+
+#include <sys/stat.h>
+
+#include <cerrno>
+#include <optional>
+#include <string>
+
+#include "files/file_manager.h"
+#include "foundation/file_io.h"
+
+namespace pinwell::files {
+
+using foundation::Error;
+using foundation::FileDescriptor;
+
+/// Largest piece that is read or written with one call, and so the most that memory grows by at a time.
+inline constexpr std::size_t kPieceSize = std::size_t{256} * 1024;
+
+/// The answer of `call`, made again for as long as a signal interrupts it.
+template <class Call>
+auto uninterrupted(Call call) {
+    for (;;) {
+        const auto answer = call();
+        if (answer != -1 || errno != EINTR) return answer;
+    }
+}
+
+/// The failure of the call made just before.
+inline Error lastError(const std::string& path) {
+    return Error::posix(errno, path);
+}
+
+/// An open regular file, with the path that its errors name and its status when it was opened.
+struct OpenFile {
+    FileDescriptor descriptor;
+    std::string path;
+    struct stat status {};
+
+    int number() const noexcept { return descriptor.get(); }
+};
+
+/// The directory that a path's last component stands in.
+std::string directoryOf(const std::string& path);
+
+/// Status of the item itself, a link not followed.
+Result<struct stat> statusOfItem(const std::string& path);
+
+/// Why an item of this type is not the regular file that was asked for; 0 when it is.
+int notRegularReason(mode_t mode);
+
+/// Opens what is a regular file before and after opening; never follows a link in the last component, never
+/// blocks, and never opens a device. `access` is O_RDONLY, O_WRONLY or O_RDWR.
+Result<OpenFile> openRegularFile(const std::string& path, int access);
+
+/// Makes and opens a file of mode 0600, for writing; there must be nothing at `path` yet.
+Result<OpenFile> createFile(const std::string& path);
+
+/// Makes and opens a hidden file of mode 0600 and of a name that was free, in `directory`.
+Result<OpenFile> createTemporaryFile(const std::string& directory);
+
+/// Opens the directory itself, a link in the last component not followed unless it is asked for.
+enum class LastLink { refused, followed };
+Result<FileDescriptor> openDirectory(const std::string& path, LastLink link);
+
+Result<void> writeAll(const OpenFile& file, ByteView bytes);
+
+/// Reads from the current position until `length` bytes are had or the file ends.
+Result<Data> readUpTo(const OpenFile& file, std::uint64_t length);
+
+/// Returns when what `descriptor` stands for is on stable storage.
+Result<void> flush(int descriptor, const std::string& path);
+
+/// Closes and reports what the file system has kept back until now.
+Result<void> closeReporting(OpenFile& file);
+
+/// Unlinks a file that was begun and not kept, so that no failure leaves half of one behind.
+class HalfMadeFile {
+  public:
+    explicit HalfMadeFile(std::string path) : path_(std::move(path)) {}
+    ~HalfMadeFile();
+    HalfMadeFile(const HalfMadeFile&) = delete;
+    HalfMadeFile& operator=(const HalfMadeFile&) = delete;
+
+    void keep() noexcept { kept_ = true; }
+
+  private:
+    std::string path_;
+    bool kept_ = false;
+};
+
+}  // namespace pinwell::files
