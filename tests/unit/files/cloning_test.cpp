@@ -1,0 +1,96 @@
+#include "fixture.h"
+#include "volume.h"
+
+namespace pinwell::test {
+namespace {
+
+using files::URL;
+using testing::ElementsAre;
+
+class Cloning : public FilesTest {
+  protected:
+    // The answer for a file of these contents, after checking that asking has left no trace.
+    bool answerOn(const Volume& volume, const std::string& contents) {
+        const std::string file = volume / "file";
+        writeFile(file, contents);
+        const auto before = statusOf(file);
+        const auto names = namesIn(volume.path());
+        const auto answer = manager->volumeSupportsCloning(URL::fileURLWithPath(file));
+        EXPECT_THAT(answer, Succeeds());
+        EXPECT_EQ(namesIn(volume.path()), names);
+        EXPECT_EQ(readFile(file), contents);
+        EXPECT_EQ(statusOf(file).st_ctim.tv_nsec, before.st_ctim.tv_nsec);
+        return answer && *answer;
+    }
+};
+
+TEST_F(Cloning, IsSupportedOnXFSWithReflinks) {
+    const Volume volume("xfs");
+    if (volume.missing()) GTEST_SKIP() << *volume.missing();
+    EXPECT_TRUE(answerOn(volume, irregularBytes(5000)));
+}
+
+TEST_F(Cloning, IsSupportedForAnEmptyFile) {
+    const Volume volume("xfs");
+    if (volume.missing()) GTEST_SKIP() << *volume.missing();
+    EXPECT_TRUE(answerOn(volume, ""));
+}
+
+TEST_F(Cloning, IsSupportedForAFileLongerThanTheProbe) {
+    const Volume volume("xfs");
+    if (volume.missing()) GTEST_SKIP() << *volume.missing();
+    EXPECT_TRUE(answerOn(volume, irregularBytes(3'000'001)));
+}
+
+TEST_F(Cloning, IsSupportedOnBtrfs) {
+    const Volume volume("btrfs");
+    if (volume.missing()) GTEST_SKIP() << *volume.missing();
+    EXPECT_TRUE(answerOn(volume, irregularBytes(5000)));
+}
+
+TEST_F(Cloning, IsNotSupportedOnXFSWithoutReflinks) {
+    const Volume volume("xfs -m reflink=0");
+    if (volume.missing()) GTEST_SKIP() << *volume.missing();
+    EXPECT_FALSE(answerOn(volume, irregularBytes(5000)));
+    EXPECT_FALSE(answerOn(volume, ""));
+}
+
+TEST_F(Cloning, IsNotSupportedInMemory) {
+    const Volume volume("tmpfs");
+    if (volume.missing()) GTEST_SKIP() << *volume.missing();
+    EXPECT_FALSE(answerOn(volume, irregularBytes(5000)));
+}
+
+TEST_F(Cloning, AnswersOnWhateverTheTestsRunOnAndLeavesNothing) {
+    writeFile(path("file"), "contents");
+    EXPECT_THAT(manager->volumeSupportsCloning(url("file")), Succeeds());
+    EXPECT_THAT(namesIn(directory.path()), ElementsAre("file"));
+    EXPECT_EQ(readFile(path("file")), "contents");
+}
+
+TEST_F(Cloning, CannotBeAskedOfAFileThatMayNotBeRead) {
+    const AsOrdinaryUser user(directory.path());
+    writeFile(path("file"), "contents");
+    setMode(path("file"), 0200);
+    EXPECT_THAT(manager->volumeSupportsCloning(url("file")), FailsWith(EACCES, path("file")));
+}
+
+TEST_F(Cloning, CannotBeAskedInADirectoryThatMayNotBeWritten) {
+    const AsOrdinaryUser user(directory.path());
+    writeFile(path("folder/file"), "contents");
+    setMode(path("folder"), 0500);
+    EXPECT_THAT(manager->volumeSupportsCloning(url("folder/file")), FailsWith(EACCES, path("folder")));
+}
+
+TEST_F(Cloning, CannotBeAskedOfWhatIsNoRegularFile) {
+    makeDirectory(path("folder"));
+    makeLink("folder", path("link"));
+    makeFifo(path("fifo"));
+    EXPECT_THAT(manager->volumeSupportsCloning(url("folder")), FailsWith(EISDIR, path("folder")));
+    EXPECT_THAT(manager->volumeSupportsCloning(url("link")), FailsWith(ELOOP, path("link")));
+    EXPECT_THAT(manager->volumeSupportsCloning(url("fifo")), FailsWith(EINVAL, path("fifo")));
+    EXPECT_THAT(manager->volumeSupportsCloning(url("none")), FailsWith(ENOENT, path("none")));
+}
+
+}  // namespace
+}  // namespace pinwell::test

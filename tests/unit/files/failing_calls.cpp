@@ -1,0 +1,206 @@
+#include "failing_calls.h"
+
+#include <dirent.h>
+#include <fcntl.h>
+#include <sys/ioctl.h>
+#include <sys/stat.h>
+#include <sys/types.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdarg>
+#include <ctime>
+#include <utility>
+
+namespace pinwell::test {
+namespace {
+
+thread_local Trouble* current = nullptr;
+
+constexpr std::size_t kShortCount = 3;
+
+// The calls that POSIX lets a signal interrupt.
+const std::set<std::string>& interruptible() {
+    static const std::set<std::string> calls{"open",   "openat", "mkostemp", "close",          "read",
+                                             "write",  "pread",  "pwrite",   "fsync",          "ftruncate",
+                                             "fchmod", "fchown", "ioctl",    "copy_file_range"};
+    return calls;
+}
+
+bool fails(const char* name) {
+    return current != nullptr && current->fails(name);
+}
+std::size_t shortened(std::size_t count) {
+    return current != nullptr && current->isShort() ? std::min(count, kShortCount) : count;
+}
+
+}  // namespace
+
+Trouble::Trouble(Kind kind, std::size_t number, std::set<std::string> names, int reason)
+    : kind_(kind), number_(number), names_(std::move(names)), reason_(reason) {
+    current = this;
+}
+
+Trouble::~Trouble() {
+    current = nullptr;
+}
+
+Trouble Trouble::atCall(std::size_t number, int reason) {
+    return {Kind::atCall, number, {}, reason};
+}
+Trouble Trouble::atEvery(std::set<std::string> names, int reason) {
+    return {Kind::atEvery, 0, std::move(names), reason};
+}
+Trouble Trouble::interruptions() {
+    return {Kind::interruptions, 0, {}, EINTR};
+}
+Trouble Trouble::shortCounts() {
+    return {Kind::shortCounts, 0, {}, 0};
+}
+Trouble Trouble::none() {
+    return {Kind::none, 0, {}, 0};
+}
+
+bool Trouble::fails(const std::string& name) {
+    const std::size_t number = calls_++;
+    bool failing = false;
+    switch (kind_) {
+        case Kind::none:
+        case Kind::shortCounts:
+            break;
+        case Kind::atCall:
+            failing = number == number_;
+            break;
+        case Kind::atEvery:
+            failing = names_.contains(name);
+            break;
+        case Kind::interruptions:
+            if (!interruptible().contains(name)) break;
+            failing = std::exchange(interrupted_, name) != name;
+            break;
+    }
+    if (!failing) {
+        interrupted_.clear();
+        return false;
+    }
+    failedCall_ = name;
+    errno = reason_;
+    return true;
+}
+
+void Trouble::noteOpening(int flags) {
+    if ((flags & O_CLOEXEC) == 0) ++inheritable_;
+}
+
+}  // namespace pinwell::test
+
+// The linker's names; each does what its call does, or fails.
+// NOLINTBEGIN: reserved and variadic names that are not ours to choose
+using pinwell::test::current;
+using pinwell::test::fails;
+using pinwell::test::shortened;
+
+namespace {
+void noteOpening(int flags) {
+    if (current != nullptr) current->noteOpening(flags);
+}
+mode_t modeArgument(int flags, va_list arguments) {
+    const bool present = (flags & O_CREAT) != 0 || (flags & O_TMPFILE) == O_TMPFILE;
+    return present ? va_arg(arguments, mode_t) : 0;
+}
+}  // namespace
+
+extern "C" {
+
+#define PINWELL_WRAP(answer, failure, call, parameters, arguments) \
+    answer __real_##call parameters;                               \
+    answer __wrap_##call parameters;                               \
+    answer __wrap_##call parameters {                              \
+        return fails(#call) ? failure : __real_##call arguments;   \
+    }
+
+PINWELL_WRAP(int, -1, fchmod, (int file, mode_t mode), (file, mode))
+PINWELL_WRAP(int, -1, fchown, (int file, uid_t user, gid_t group), (file, user, group))
+PINWELL_WRAP(DIR*, nullptr, fdopendir, (int file), (file))
+PINWELL_WRAP(ssize_t, -1, fgetxattr, (int file, const char* name, void* value, size_t size),
+             (file, name, value, size))
+PINWELL_WRAP(ssize_t, -1, flistxattr, (int file, char* list, size_t size), (file, list, size))
+PINWELL_WRAP(int, -1, fremovexattr, (int file, const char* name), (file, name))
+PINWELL_WRAP(int, -1, fsetxattr, (int file, const char* name, const void* value, size_t size, int flags),
+             (file, name, value, size, flags))
+PINWELL_WRAP(int, -1, fstat, (int file, struct stat* status), (file, status))
+PINWELL_WRAP(int, -1, fsync, (int file), (file))
+PINWELL_WRAP(int, -1, ftruncate, (int file, off_t length), (file, length))
+PINWELL_WRAP(int, -1, futimens, (int file, const timespec* times), (file, times))
+PINWELL_WRAP(off_t, -1, lseek, (int file, off_t distance, int from), (file, distance, from))
+PINWELL_WRAP(int, -1, lstat, (const char* path, struct stat* status), (path, status))
+PINWELL_WRAP(char*, nullptr, mkdtemp, (char* pattern), (pattern))
+PINWELL_WRAP(dirent*, nullptr, readdir, (DIR * stream), (stream))
+PINWELL_WRAP(ssize_t, -1, readlink, (const char* path, char* target, size_t size), (path, target, size))
+PINWELL_WRAP(int, -1, rename, (const char* from, const char* to), (from, to))
+PINWELL_WRAP(int, -1, unlinkat, (int directory, const char* name, int flags), (directory, name, flags))
+PINWELL_WRAP(ssize_t, -1, read, (int file, void* bytes, size_t count), (file, bytes, shortened(count)))
+PINWELL_WRAP(ssize_t, -1, write, (int file, const void* bytes, size_t count), (file, bytes, shortened(count)))
+PINWELL_WRAP(ssize_t, -1, pread, (int file, void* bytes, size_t count, off_t at),
+             (file, bytes, shortened(count), at))
+PINWELL_WRAP(ssize_t, -1, pwrite, (int file, const void* bytes, size_t count, off_t at),
+             (file, bytes, shortened(count), at))
+PINWELL_WRAP(ssize_t, -1, copy_file_range,
+             (int from, off_t* in, int to, off_t* out, size_t count, unsigned flags),
+             (from, in, to, out, shortened(count), flags))
+
+#undef PINWELL_WRAP
+
+// Closes in any case, as the kernel does.
+int __real_close(int file);
+int __wrap_close(int file);
+int __wrap_close(int file) {
+    if (!fails("close")) return __real_close(file);
+    const int reason = errno;
+    __real_close(file);
+    errno = reason;
+    return -1;
+}
+
+int __real_mkostemp(char* pattern, int flags);
+int __wrap_mkostemp(char* pattern, int flags);
+int __wrap_mkostemp(char* pattern, int flags) {
+    noteOpening(flags);
+    return fails("mkostemp") ? -1 : __real_mkostemp(pattern, flags);
+}
+
+int __real_open(const char* path, int flags, ...);
+int __wrap_open(const char* path, int flags, ...);
+int __wrap_open(const char* path, int flags, ...) {
+    va_list arguments;
+    va_start(arguments, flags);
+    const mode_t mode = modeArgument(flags, arguments);
+    va_end(arguments);
+    noteOpening(flags);
+    return fails("open") ? -1 : __real_open(path, flags, mode);
+}
+
+int __real_openat(int directory, const char* path, int flags, ...);
+int __wrap_openat(int directory, const char* path, int flags, ...);
+int __wrap_openat(int directory, const char* path, int flags, ...) {
+    va_list arguments;
+    va_start(arguments, flags);
+    const mode_t mode = modeArgument(flags, arguments);
+    va_end(arguments);
+    noteOpening(flags);
+    return fails("openat") ? -1 : __real_openat(directory, path, flags, mode);
+}
+
+// Every request that the file service makes takes one word, a number or a pointer.
+int __real_ioctl(int file, unsigned long request, ...);
+int __wrap_ioctl(int file, unsigned long request, ...);
+int __wrap_ioctl(int file, unsigned long request, ...) {
+    va_list arguments;
+    va_start(arguments, request);
+    const unsigned long argument = va_arg(arguments, unsigned long);
+    va_end(arguments);
+    return fails("ioctl") ? -1 : __real_ioctl(file, request, argument);
+}
+
+}  // extern "C"
+// NOLINTEND

@@ -1,0 +1,381 @@
+// Whatever call fails: the error comes out, the old file or the new one is there, nothing half made stays,
+// and no file is left open.
+#include "failing_calls.h"
+
+#include <cerrno>
+#include <filesystem>
+#include <functional>
+#include <set>
+
+#include "files/file_manager.h"
+#include "fixture.h"
+#include "volume.h"
+
+namespace pinwell::test {
+namespace {
+
+using files::FileManager;
+using files::URL;
+using foundation::asBytes;
+using testing::AnyOf;
+using testing::Contains;
+using testing::ElementsAre;
+using testing::IsSubsetOf;
+
+constexpr const char* kAccessControlList = "system.posix_acl_access";
+
+class FailingCalls : public FilesTest {
+  protected:
+    // How an attempt went: nothing when it succeeded, otherwise its errno.
+    using Attempt = std::function<std::optional<std::int64_t>()>;
+
+    template <class T>
+    static std::optional<std::int64_t> outcome(const foundation::Result<T>& result) {
+        if (result) return std::nullopt;
+        EXPECT_FALSE(result.error().userInfo().empty()) << "the error names no path";
+        return result.error().code();
+    }
+
+    // Makes the attempt once for every call in it, with that call failing; `check` learns the call and the
+    // outcome. Answers the names of the calls that failed.
+    std::set<std::string> failEachCall(const std::function<void()>& prepare, const Attempt& attempt,
+                                       const std::function<void(const std::string&, bool)>& check) {
+        std::set<std::string> names;
+        for (std::size_t number = 0;; ++number) {
+            prepare();
+            const std::size_t openBefore = openFileCount();
+            std::optional<std::int64_t> reason;
+            std::string failed;
+            {
+                const Trouble trouble = Trouble::atCall(number, EIO);
+                reason = attempt();
+                failed = trouble.failedCall();
+            }
+            EXPECT_EQ(openFileCount(), openBefore) << "after call " << number << ", " << failed;
+            if (reason) {
+                EXPECT_EQ(*reason, EIO) << "after call " << number << ", " << failed;
+            }
+            check(failed, reason.has_value());
+            if (failed.empty()) {
+                EXPECT_FALSE(reason) << "failed without a cause";
+                return names;
+            }
+            names.insert(failed);
+        }
+    }
+
+    void clear() {
+        for (const auto& entry : std::filesystem::directory_iterator(directory.path()))
+            std::filesystem::remove_all(entry.path());
+    }
+
+    void prepareFiles() {
+        clear();
+        writeFile(path("original"), "old");
+        setAttribute(path("original"), "user.origin", "somewhere");
+        setAttribute(path("original"), kAccessControlList, listThatLetsAnotherRead());
+    }
+};
+
+TEST_F(FailingCalls, InACopyLeaveAWholeCopyOrNone) {
+    std::set<std::string> fatal;
+    const auto calls = failEachCall(
+        [&] { prepareFiles(); }, [&] { return outcome(manager->copyItem(url("original"), url("copy"))); },
+        [&](const std::string& failed, bool isError) {
+            EXPECT_EQ(readFile(path("original")), "old");
+            if (isError) {
+                fatal.insert(failed);
+                EXPECT_THAT(namesIn(directory.path()), ElementsAre("original")) << failed;
+                return;
+            }
+            EXPECT_THAT(failed, AnyOf("", "ioctl", "copy_file_range", "close"));
+            EXPECT_EQ(readFile(path("copy")), "old");
+            EXPECT_EQ(attribute(path("copy"), "user.origin"), "somewhere");
+            EXPECT_EQ(attribute(path("copy"), kAccessControlList), listThatLetsAnotherRead());
+        });
+    EXPECT_THAT((std::set<std::string>{"lstat", "open", "fstat", "lseek", "ftruncate", "fchmod", "fchown",
+                                       "flistxattr", "fgetxattr", "fsetxattr", "futimens", "close"}),
+                IsSubsetOf(fatal));
+    EXPECT_THAT(calls, Contains("ioctl"));
+}
+
+TEST_F(FailingCalls, InACopyByHandNameTheFileThatTheyConcern) {
+    for (const auto& [call, name] : {std::pair{"pread", "original"}, {"pwrite", "copy"}}) {
+        prepareFiles();
+        foundation::Result<void> done;
+        {
+            const Trouble trouble = Trouble::atEvery({"ioctl", "copy_file_range", call}, ENOSPC);
+            done = manager->copyItem(url("original"), url("copy"));
+        }
+        EXPECT_THAT(done, FailsWith(ENOSPC, path(name)));
+        EXPECT_THAT(namesIn(directory.path()), ElementsAre("original"));
+    }
+}
+
+TEST_F(FailingCalls, InACopyFallBackToReadingAndWriting) {
+    const std::string contents = irregularBytes(300'001);
+    for (const int reason : {EXDEV, EINVAL, EOPNOTSUPP, ENOSYS, EPERM}) {
+        clear();
+        writeFile(path("original"), contents);
+        {
+            const Trouble trouble = Trouble::atEvery({"ioctl", "copy_file_range"}, reason);
+            ASSERT_THAT(manager->copyItem(url("original"), url("copy")), Succeeds());
+        }
+        EXPECT_EQ(readFile(path("copy")), contents);
+    }
+}
+
+TEST_F(FailingCalls, InACopyOfAFileSystemThatKnowsNoHoles) {
+    const std::string contents = irregularBytes(300'001);
+    writeFile(path("original"), contents);
+    {
+        const Trouble trouble = Trouble::atEvery({"lseek"}, EINVAL);
+        ASSERT_THAT(manager->copyItem(url("original"), url("copy")), Succeeds());
+    }
+    EXPECT_EQ(readFile(path("copy")), contents);
+}
+
+TEST_F(FailingCalls, ThatLoseAnAccessControlListOpenTheFileToNobody) {
+    prepareFiles();
+    ASSERT_EQ(permissionsOf(path("original")), 0640U);  // the mask; the owning group itself has no rights
+    {
+        const Trouble trouble = Trouble::atEvery({"fsetxattr"}, EOPNOTSUPP);
+        ASSERT_THAT(manager->copyItem(url("original"), url("copy")), Succeeds());
+    }
+    EXPECT_EQ(permissionsOf(path("copy")), 0600U);
+}
+
+TEST_F(FailingCalls, InAReplacementLeaveTheOldFileOrTheNewOne) {
+    URL copy = url("none");
+    const auto calls = failEachCall(
+        [&] {
+            prepareFiles();
+            const auto made = manager->createReplacementDirectory(url("original"));
+            copy = made->appendingPathComponent("original");
+            writeFile(copy.path(), "new");
+        },
+        [&] { return outcome(manager->replaceItem(url("original"), copy)); },
+        [&](const std::string& failed, bool isError) {
+            const std::string now = readFile(path("original"));
+            EXPECT_THAT(now, AnyOf("old", "new")) << failed;
+            EXPECT_EQ(attribute(path("original"), "user.origin"), "somewhere") << failed;
+            EXPECT_EQ(attribute(path("original"), kAccessControlList), listThatLetsAnotherRead()) << failed;
+            if (now == "old") {
+                EXPECT_TRUE(isError) << failed;
+                EXPECT_EQ(readFile(copy.path()), "new") << failed;
+            } else {
+                EXPECT_THAT(namesIn(directory.path()), ElementsAre("original")) << failed;
+                EXPECT_THAT(failed, AnyOf("", "fsync", "close"));
+            }
+        });
+    EXPECT_THAT((std::set<std::string>{"lstat", "open", "fstat", "fchmod", "fchown", "flistxattr",
+                                       "fgetxattr", "fsetxattr", "fsync", "rename"}),
+                IsSubsetOf(calls));
+}
+
+TEST_F(FailingCalls, InAnAtomicWriteLeaveTheOldFileOrTheNewOne) {
+    const auto calls = failEachCall(
+        [&] {
+            clear();
+            writeFile(path("file"), "old");
+        },
+        [&] {
+            return outcome(manager->writeFile(asBytes("new"), url("file"), FileManager::Writing::atomic));
+        },
+        [&](const std::string& failed, bool isError) {
+            EXPECT_THAT(namesIn(directory.path()), ElementsAre("file")) << failed;
+            const std::string now = readFile(path("file"));
+            EXPECT_THAT(now, AnyOf("old", "new")) << failed;
+            if (now == "old") {
+                EXPECT_TRUE(isError) << failed;
+            }
+        });
+    EXPECT_THAT(
+        (std::set<std::string>{"open", "mkostemp", "fstat", "fchmod", "write", "fsync", "close", "rename"}),
+        IsSubsetOf(calls));
+}
+
+TEST_F(FailingCalls, InAPlainWriteLeaveAWholeNewFileOrNone) {
+    const auto calls = failEachCall(
+        [&] { clear(); },
+        [&] { return outcome(manager->writeFile(asBytes("new"), url("file"), FileManager::Writing::plain)); },
+        [&](const std::string& failed, bool isError) {
+            EXPECT_EQ(exists(path("file")), !isError) << failed;
+            if (!isError) {
+                EXPECT_EQ(readFile(path("file")), "new") << failed;
+            }
+        });
+    EXPECT_THAT((std::set<std::string>{"open", "fstat", "fchmod", "write", "close"}), IsSubsetOf(calls));
+}
+
+TEST_F(FailingCalls, InAnOverwriteComeOut) {
+    const auto calls = failEachCall(
+        [&] {
+            clear();
+            writeFile(path("file"), "older");
+        },
+        [&] { return outcome(manager->writeFile(asBytes("new"), url("file"), FileManager::Writing::plain)); },
+        [&](const std::string& failed, bool isError) {
+            EXPECT_TRUE(exists(path("file"))) << failed;
+            if (!isError) {
+                EXPECT_EQ(readFile(path("file")), "new") << failed;
+            }
+        });
+    EXPECT_THAT(calls, Contains("ftruncate"));
+}
+
+TEST_F(FailingCalls, InTheQuestionOfCloningLeaveNothing) {
+    failEachCall([&] { prepareFiles(); },
+                 [&] { return outcome(manager->volumeSupportsCloning(url("original"))); },
+                 [&](const std::string& failed, bool) {
+                     EXPECT_THAT(namesIn(directory.path()), ElementsAre("original")) << failed;
+                     EXPECT_EQ(readFile(path("original")), "old") << failed;
+                 });
+}
+
+TEST_F(FailingCalls, InTheQuestionOfCloningMeanNoWhereTheKernelSaysNotHere) {
+    prepareFiles();
+    for (const int reason : {EOPNOTSUPP, EXDEV, ENOTTY, EINVAL}) {
+        const Trouble trouble = Trouble::atEvery({"ioctl"}, reason);
+        const auto answer = manager->volumeSupportsCloning(url("original"));
+        ASSERT_THAT(answer, Succeeds());
+        EXPECT_FALSE(*answer) << reason;
+    }
+}
+
+TEST_F(FailingCalls, InTheQuestionOfCloningAreGotRoundWithoutNamelessFiles) {
+    const Volume volume("xfs");
+    if (volume.missing()) GTEST_SKIP() << *volume.missing();
+    writeFile(volume / "file", "contents");
+    // lstat, open and fstat of the file come first, then the open of the nameless one.
+    const Trouble trouble = Trouble::atCall(3, EOPNOTSUPP);
+    const auto answer = manager->volumeSupportsCloning(URL::fileURLWithPath(volume / "file"));
+    ASSERT_EQ(trouble.failedCall(), "open");
+    ASSERT_THAT(answer, Succeeds());
+    EXPECT_TRUE(*answer);
+    EXPECT_THAT(namesIn(volume.path()), ElementsAre("file"));
+}
+
+TEST_F(FailingCalls, InTheMakingOfAReplacementDirectoryLeaveNone) {
+    const auto calls =
+        failEachCall([&] { prepareFiles(); },
+                     [&] { return outcome(manager->createReplacementDirectory(url("original"))); },
+                     [&](const std::string& failed, bool isError) {
+                         EXPECT_EQ(namesIn(directory.path()).size(), isError ? 1U : 2U) << failed;
+                     });
+    EXPECT_THAT((std::set<std::string>{"lstat", "mkdtemp", "open", "fchmod"}), IsSubsetOf(calls));
+}
+
+TEST_F(FailingCalls, InARemovalComeOutAndItCanBeFinished) {
+    const auto calls = failEachCall(
+        [&] {
+            clear();
+            for (const char* name : {"tree/a/b/c", "tree/a/d", "tree/e"}) writeFile(path(name), "x");
+        },
+        [&] { return outcome(manager->removeItem(url("tree"))); },
+        [&](const std::string& failed, bool isError) {
+            EXPECT_EQ(exists(path("tree")), isError) << failed;
+            if (isError) {
+                EXPECT_THAT(manager->removeItem(url("tree")), Succeeds()) << failed;
+            }
+            EXPECT_THAT(namesIn(directory.path()), ElementsAre()) << failed;
+        });
+    EXPECT_THAT((std::set<std::string>{"open", "openat", "fstat", "fdopendir", "readdir", "unlinkat"}),
+                IsSubsetOf(calls));
+}
+
+TEST_F(FailingCalls, InAWholeReadComeOut) {
+    const auto calls = failEachCall([&] { prepareFiles(); },
+                                    [&] { return outcome(manager->contentsOfFile(url("original"))); },
+                                    [](const std::string&, bool) {});
+    EXPECT_THAT((std::set<std::string>{"lstat", "open", "fstat", "read"}), IsSubsetOf(calls));
+}
+
+TEST_F(FailingCalls, OfAHandleComeOutWithWhatWasTried) {
+    writeFile(path("file"), "contents");
+    struct Row {
+        const char* call;
+        std::function<void(files::FileHandle&)> operation;
+        std::string attempt;
+    };
+    const std::vector<Row> rows{
+        {"lseek", [](files::FileHandle& handle) { handle.seekToEnd(); }, "seek in"},
+        {"lseek", [](files::FileHandle& handle) { handle.seek(1); }, "seek in"},
+        {"lseek", [](files::FileHandle& handle) { handle.position(); }, "seek in"},
+        {"read", [](files::FileHandle& handle) { handle.read(1); }, "read"},
+        {"write", [](files::FileHandle& handle) { handle.write(asBytes("x")); }, "write to"},
+        {"ftruncate", [](files::FileHandle& handle) { handle.truncate(1); }, "truncate"},
+        {"fsync", [](files::FileHandle& handle) { handle.synchronize(); }, "synchronize"},
+        {"close", [](files::FileHandle& handle) { handle.close(); }, "close"},
+    };
+    for (const Row& row : rows) {
+        const auto handle = manager->openForUpdating(url("file"));
+        ASSERT_THAT(handle, Succeeds());
+        std::string reason;
+        {
+            const Trouble trouble = Trouble::atEvery({row.call}, EIO);
+            try {
+                row.operation(**handle);
+            } catch (const files::FileHandleError& failure) {
+                reason = failure.what();
+            }
+        }
+        EXPECT_EQ(reason, "Cannot " + row.attempt + " " + path("file") + ": Input/output error");
+    }
+}
+
+// All that the file manager does with files, once each.
+void doAll(FileManager& manager, const TemporaryDirectory& directory) {
+    const URL file = directory.url("file");
+    const std::string contents = irregularBytes(5000);
+    ASSERT_THAT(manager.writeFile(asBytes(contents), file, FileManager::Writing::plain), Succeeds());
+    ASSERT_THAT(manager.writeFile(asBytes(contents), file, FileManager::Writing::atomic), Succeeds());
+    ASSERT_THAT(manager.resourceProperties(file), Succeeds());
+    ASSERT_THAT(manager.volumeSupportsCloning(file), Succeeds());
+    const auto made = manager.createReplacementDirectory(file);
+    ASSERT_THAT(made, Succeeds());
+    const URL copy = made->appendingPathComponent("file");
+    ASSERT_THAT(manager.copyItem(file, copy), Succeeds());
+    {
+        const auto handle = manager.openForUpdating(copy);
+        ASSERT_THAT(handle, Succeeds());
+        EXPECT_EQ((*handle)->seekToEnd(), contents.size());
+        (*handle)->write(asBytes("more"));
+        (*handle)->seek(0);
+        EXPECT_EQ(foundation::toString((*handle)->read(6000)), contents + "more");
+        (*handle)->truncate(4000);
+        (*handle)->synchronize();
+        (*handle)->close();
+    }
+    ASSERT_THAT(manager.replaceItem(file, copy), Succeeds());
+    const auto read = manager.contentsOfFile(file);
+    ASSERT_THAT(read, Succeeds());
+    EXPECT_EQ(foundation::toString(*read), contents.substr(0, 4000));
+    ASSERT_THAT(manager.removeItem(file), Succeeds());
+}
+
+TEST_F(FailingCalls, ThatWereOnlyInterruptedAreMadeAgain) {
+    {
+        const Trouble trouble = Trouble::interruptions();
+        doAll(*manager, directory);
+    }
+    EXPECT_THAT(namesIn(directory.path()), ElementsAre());
+}
+
+TEST_F(FailingCalls, ThatMovedAFewBytesOnlyAreContinued) {
+    {
+        const Trouble trouble = Trouble::shortCounts();
+        doAll(*manager, directory);
+    }
+    EXPECT_THAT(namesIn(directory.path()), ElementsAre());
+}
+
+TEST_F(FailingCalls, OrNotEveryFileIsOpenedCloseOnExec) {
+    const Trouble trouble = Trouble::none();
+    doAll(*manager, directory);
+    EXPECT_GT(trouble.callCount(), 50U);
+    EXPECT_EQ(trouble.openedWithoutCloseOnExec(), 0U);
+}
+
+}  // namespace
+}  // namespace pinwell::test

@@ -1,0 +1,50 @@
+#include "volume.h"
+
+#include <sched.h>
+#include <sys/mount.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <stdexcept>
+#include <string_view>
+
+namespace pinwell::test {
+namespace {
+
+bool runs(const std::string& command) {
+    return std::system((command + " >/dev/null 2>&1").c_str()) == 0;  // NOLINT: a test's own fixed commands
+}
+
+}  // namespace
+
+Volume::Volume(const std::string& fileSystem) : path_(directory_ / "volume") {
+    if (geteuid() != 0) {
+        missing_ = "only the superuser may mount volumes";
+        return;
+    }
+    if (unshare(CLONE_NEWNS) != 0 || mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) {
+        missing_ = "no mount namespace of our own to be had";
+        return;
+    }
+    if (mkdir(path_.c_str(), 0755) != 0) throw std::runtime_error(path_);
+    if (fileSystem == "tmpfs") {
+        if (mount("none", path_.c_str(), "tmpfs", 0, "size=1m") != 0) missing_ = "tmpfs cannot be mounted";
+        return;
+    }
+    const std::string image = directory_ / "image";
+    const std::string_view kind = std::string_view(fileSystem).substr(0, fileSystem.find(' '));
+    const std::string make =
+        "mkfs." + fileSystem + (kind == "btrfs" ? " -q --nodiscard " : " -q -K ") + image;
+    if (!runs("truncate -s 320M " + image) || !runs(make)) {
+        missing_ = "mkfs." + fileSystem + " does not work here";
+    } else if (!runs("mount -t " + std::string(kind) + " -o loop " + image + " " + path_)) {
+        missing_ = "no loop device, or the kernel cannot mount " + fileSystem;
+    }
+}
+
+Volume::~Volume() {
+    if (!missing_) umount2(path_.c_str(), MNT_DETACH);
+}
+
+}  // namespace pinwell::test
