@@ -180,6 +180,14 @@ int __wrap_open(const char* path, int flags, ...) {
     return fails("open") ? -1 : __real_open(path, flags, mode);
 }
 
+// What open becomes in a fortified build when its flags are not constant.
+int __real___open_2(const char* path, int flags);
+int __wrap___open_2(const char* path, int flags);
+int __wrap___open_2(const char* path, int flags) {
+    noteOpening(flags);
+    return fails("open") ? -1 : __real___open_2(path, flags);
+}
+
 int __real_openat(int directory, const char* path, int flags, ...);
 int __wrap_openat(int directory, const char* path, int flags, ...);
 int __wrap_openat(int directory, const char* path, int flags, ...) {

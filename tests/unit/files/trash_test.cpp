@@ -6,8 +6,38 @@
 #include "fixture.h"
 #include "volume.h"
 
+#if defined(__has_feature)
+#if __has_feature(address_sanitizer)
+#define PINWELL_ADDRESS_SANITIZER
+#endif
+#elif defined(__SANITIZE_ADDRESS__)
+#define PINWELL_ADDRESS_SANITIZER
+#endif
+#ifdef PINWELL_ADDRESS_SANITIZER
+#include <sanitizer/lsan_interface.h>
+#endif
+
 namespace pinwell::test {
 namespace {
+
+// For as long as it lives, the leak detector looks away: where the move into the trash itself is refused,
+// GLib 2.74 does not free the texts of the info file.
+class KnownLeaks {
+  public:
+#ifdef PINWELL_ADDRESS_SANITIZER
+    KnownLeaks() {
+        __lsan_disable();
+    }
+    ~KnownLeaks() {
+        __lsan_enable();
+    }
+#else
+    KnownLeaks() {}   // NOLINT: not trivial, so that
+    ~KnownLeaks() {}  // NOLINT: the guard is not an unused variable
+#endif
+    KnownLeaks(const KnownLeaks&) = delete;
+    KnownLeaks& operator=(const KnownLeaks&) = delete;
+};
 
 using files::URL;
 using testing::HasSubstr;
@@ -117,6 +147,7 @@ TEST_F(Trash, LeavesTheItemWhereItMayNotBeMoved) {
     const AsOrdinaryUser user(directory.path(), home->path());
     writeFile(path("closed/file"), "x");
     setMode(path("closed"), 0500);
+    const KnownLeaks knownLeaks;
     const auto place = manager->trashItem(url("closed/file"));
     ASSERT_FALSE(place);
     EXPECT_EQ(place.error().code(), EACCES);
