@@ -1,0 +1,327 @@
+#include "support/certificate_builder.h"
+
+#include <arpa/inet.h>
+#include <openssl/bio.h>
+#include <openssl/ec.h>
+#include <openssl/evp.h>
+#include <openssl/pem.h>
+#include <openssl/rsa.h>
+#include <openssl/sha.h>
+#include <openssl/x509.h>
+#include <openssl/x509v3.h>
+
+#include <map>
+#include <mutex>
+#include <stdexcept>
+
+#include "foundation/byte_writer.h"
+
+namespace pinwell::test {
+namespace {
+
+using foundation::ByteView;
+using foundation::ByteWriter;
+using foundation::Data;
+
+template <auto release>
+struct Releaser {
+    template <class T>
+    void operator()(T* object) const {
+        release(object);
+    }
+};
+template <class T, auto release>
+using Handle = std::unique_ptr<T, Releaser<release>>;
+
+using BioHandle = Handle<BIO, BIO_free_all>;
+using CertificateHandle = Handle<X509, X509_free>;
+using DigestHandle = Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
+using ExtensionHandle = Handle<X509_EXTENSION, X509_EXTENSION_free>;
+using NameHandle = Handle<X509_NAME, X509_NAME_free>;
+using ObjectHandle = Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
+using OctetsHandle = Handle<ASN1_OCTET_STRING, ASN1_OCTET_STRING_free>;
+
+void require(bool success, const char* what) {
+    if (!success) throw std::runtime_error(std::string("certificate builder: ") + what);
+}
+
+const unsigned char* unsignedBytes(const std::byte* bytes) {
+    return static_cast<const unsigned char*>(static_cast<const void*>(bytes));
+}
+unsigned char* unsignedBytes(std::byte* bytes) {
+    return static_cast<unsigned char*>(static_cast<void*>(bytes));
+}
+const unsigned char* unsignedText(const std::string& text) {
+    return static_cast<const unsigned char*>(static_cast<const void*>(text.data()));
+}
+
+/// Runs one of OpenSSL's i2d functions twice: for the size, then for the bytes.
+template <class Object, class Encode>
+Data encoded(Object* object, Encode encode) {
+    const int size = encode(object, nullptr);
+    require(size > 0, "encoding failed");
+    Data der(static_cast<std::size_t>(size));
+    unsigned char* out = unsignedBytes(der.data());
+    encode(object, &out);
+    return der;
+}
+
+std::string contents(BIO* bio) {
+    char* text = nullptr;
+    const long size = BIO_get_mem_data(bio, &text);
+    return {text, static_cast<std::size_t>(size)};
+}
+
+EVP_PKEY* generatePair(KeyKind kind) {
+    switch (kind) {
+        case KeyKind::p224:
+            return EVP_EC_gen("P-224");
+        case KeyKind::p256:
+            return EVP_EC_gen("P-256");
+        case KeyKind::p384:
+            return EVP_EC_gen("P-384");
+        case KeyKind::p521:
+            return EVP_EC_gen("P-521");
+        case KeyKind::rsa1024:
+            return EVP_RSA_gen(1024U);
+        case KeyKind::rsa2048:
+            return EVP_RSA_gen(2048U);
+        case KeyKind::rsa3072:
+            return EVP_RSA_gen(3072U);
+        case KeyKind::ed25519:
+            return EVP_PKEY_Q_keygen(nullptr, nullptr, "ED25519");
+    }
+    return nullptr;
+}
+
+NameHandle makeName(const DistinguishedName& name) {
+    NameHandle result(X509_NAME_new());
+    for (const auto& [attribute, value] : name) {
+        require(X509_NAME_add_entry_by_txt(result.get(), attribute.c_str(), MBSTRING_UTF8,
+                                           unsignedText(value), static_cast<int>(value.size()), -1, 0) == 1,
+                "bad name attribute");
+    }
+    return result;
+}
+
+void addExtension(X509* certificate, const ExtensionField& field) {
+    const ObjectHandle oid(OBJ_txt2obj(field.oid.c_str(), 1));
+    require(oid != nullptr, "bad extension OID");
+    const OctetsHandle value(ASN1_OCTET_STRING_new());
+    require(ASN1_OCTET_STRING_set(value.get(), unsignedBytes(field.value.data()),
+                                  static_cast<int>(field.value.size())) == 1,
+            "bad extension value");
+    const ExtensionHandle extension(
+        X509_EXTENSION_create_by_OBJ(nullptr, oid.get(), field.critical ? 1 : 0, value.get()));
+    require(X509_add_ext(certificate, extension.get(), -1) == 1, "cannot add extension");
+}
+
+/// An extension in the words of openssl.cnf.
+void addNamedExtension(X509* certificate, int nid, const std::string& words) {
+    if (words.empty()) return;
+    X509V3_CTX context;
+    X509V3_set_ctx(&context, certificate, certificate, nullptr, nullptr, 0);
+    const ExtensionHandle extension(X509V3_EXT_nconf_nid(nullptr, &context, nid, words.c_str()));
+    require(extension != nullptr, words.c_str());
+    require(X509_add_ext(certificate, extension.get(), -1) == 1, "cannot add extension");
+}
+
+void addBasicConstraints(X509* certificate, const std::optional<BasicConstraints>& constraints) {
+    if (!constraints) return;
+    std::string words = constraints->critical ? "critical," : "";
+    words += constraints->isCertificateAuthority ? "CA:TRUE" : "CA:FALSE";
+    if (constraints->pathLength) words += ",pathlen:" + std::to_string(*constraints->pathLength);
+    addNamedExtension(certificate, NID_basic_constraints, words);
+}
+
+Data shortElement(std::uint8_t tag, ByteView content) {
+    require(content.size() < 128, "key identifier too long for a short length");
+    return ByteWriter().u8(tag).u8(static_cast<std::uint8_t>(content.size())).bytes(content).data();
+}
+
+std::optional<Data> resolve(const KeyIdentifier& identifier, const std::optional<Data>& computed) {
+    switch (identifier.kind) {
+        case KeyIdentifier::Kind::computed:
+            return computed;
+        case KeyIdentifier::Kind::omitted:
+            return std::nullopt;
+        case KeyIdentifier::Kind::given:
+            return identifier.value;
+    }
+    return std::nullopt;
+}
+
+/// RFC 5280, 4.2.1.2, method (1): SHA-1 of the subjectPublicKey bit string.
+Data publicKeyDigest(X509* certificate) {
+    Data digest(SHA_DIGEST_LENGTH);
+    unsigned size = 0;
+    require(X509_pubkey_digest(certificate, EVP_sha1(), unsignedBytes(digest.data()), &size) == 1, "digest");
+    return digest;
+}
+
+const EVP_MD* messageDigest(const SigningKey& signer, SignatureDigest digest) {
+    if (EVP_PKEY_is_a(signer.native(), "ED25519") == 1) return nullptr;
+    switch (digest) {
+        case SignatureDigest::md5:
+            return EVP_md5();
+        case SignatureDigest::sha1:
+            return EVP_sha1();
+        case SignatureDigest::sha256:
+            return EVP_sha256();
+        case SignatureDigest::sha384:
+            return EVP_sha384();
+    }
+    return nullptr;
+}
+
+void addExtensions(X509* certificate, const CertificateFields& fields, const std::optional<Data>& subjectId,
+                   const std::optional<Data>& authorityId) {
+    addBasicConstraints(certificate, fields.basicConstraints);
+    addNamedExtension(certificate, NID_key_usage, fields.keyUsage);
+    addNamedExtension(certificate, NID_ext_key_usage, fields.extendedKeyUsage);
+    addNamedExtension(certificate, NID_subject_alt_name, fields.subjectAlternativeNames);
+    if (subjectId) addExtension(certificate, {"2.5.29.14", false, shortElement(0x04, *subjectId)});
+    if (authorityId) {
+        addExtension(certificate, {"2.5.29.35", false, shortElement(0x30, shortElement(0x80, *authorityId))});
+    }
+    for (const std::string& marker : fields.markers) addExtension(certificate, {marker});
+    for (const ExtensionField& extension : fields.extensions) addExtension(certificate, extension);
+}
+
+}  // namespace
+
+SigningKey SigningKey::generate(KeyKind kind) {
+    EVP_PKEY* const pair = generatePair(kind);
+    require(pair != nullptr, "key generation failed");
+    return SigningKey(std::shared_ptr<EVP_PKEY>(pair, EVP_PKEY_free));
+}
+
+SigningKey SigningKey::cached(KeyKind kind, const std::string& name) {
+    static std::mutex mutex;
+    static std::map<std::pair<KeyKind, std::string>, SigningKey> keys;
+    const std::lock_guard lock(mutex);
+    const auto found = keys.find({kind, name});
+    if (found != keys.end()) return found->second;
+    return keys.emplace(std::pair{kind, name}, generate(kind)).first->second;
+}
+
+std::string SigningKey::pem() const {
+    const BioHandle bio(BIO_new(BIO_s_mem()));
+    require(PEM_write_bio_PrivateKey(bio.get(), native(), nullptr, nullptr, 0, nullptr, nullptr) == 1, "PEM");
+    return contents(bio.get());
+}
+
+Data SigningKey::publicKeyInfo() const {
+    return encoded(native(), i2d_PUBKEY);
+}
+
+Data SigningKey::sign(ByteView message) const {
+    const DigestHandle context(EVP_MD_CTX_new());
+    require(EVP_DigestSignInit(context.get(), nullptr, EVP_sha256(), nullptr, native()) == 1, "sign");
+    std::size_t size = 0;
+    require(EVP_DigestSign(context.get(), nullptr, &size, unsignedBytes(message.data()), message.size()) == 1,
+            "sign");
+    Data signature(size);
+    require(EVP_DigestSign(context.get(), unsignedBytes(signature.data()), &size,
+                           unsignedBytes(message.data()), message.size()) == 1,
+            "sign");
+    signature.resize(size);
+    return signature;
+}
+
+std::string toPem(std::string_view label, ByteView der) {
+    const BioHandle bio(BIO_new(BIO_s_mem()));
+    require(PEM_write_bio(bio.get(), std::string(label).c_str(), "", unsignedBytes(der.data()),
+                          static_cast<long>(der.size())) > 0,
+            "PEM");
+    return contents(bio.get());
+}
+
+std::string IssuedCertificate::pem() const {
+    return toPem("CERTIFICATE", der);
+}
+
+IssuedCertificate issueCertificate(const CertificateFields& fields, const IssuedCertificate* issuer) {
+    const CertificateHandle certificate(X509_new());
+    const DistinguishedName& issuerName = issuer != nullptr ? issuer->subject : fields.subject;
+    const SigningKey& signer = issuer != nullptr ? issuer->key : fields.key;
+
+    require(X509_set_version(certificate.get(), fields.version - 1) == 1, "version");
+    require(ASN1_INTEGER_set_int64(X509_get_serialNumber(certificate.get()), fields.serial) == 1, "serial");
+    require(X509_set_subject_name(certificate.get(), makeName(fields.subject).get()) == 1, "subject");
+    require(X509_set_issuer_name(certificate.get(), makeName(fields.issuer.value_or(issuerName)).get()) == 1,
+            "issuer");
+    require(ASN1_TIME_set(X509_getm_notBefore(certificate.get()), fields.notBefore.seconds) != nullptr,
+            "date");
+    require(ASN1_TIME_set(X509_getm_notAfter(certificate.get()), fields.notAfter.seconds) != nullptr, "date");
+    require(X509_set_pubkey(certificate.get(), fields.key.native()) == 1, "key");
+
+    const std::optional<Data> subjectId =
+        resolve(fields.subjectKeyIdentifier, publicKeyDigest(certificate.get()));
+    const std::optional<Data> issuerId = issuer != nullptr ? issuer->subjectKeyIdentifier : subjectId;
+    addExtensions(certificate.get(), fields, subjectId, resolve(fields.authorityKeyIdentifier, issuerId));
+
+    require(X509_sign(certificate.get(), signer.native(), messageDigest(signer, fields.digest)) > 0,
+            "signing");
+    IssuedCertificate issued{encoded(certificate.get(), i2d_X509), fields.key, fields.subject, subjectId};
+    if (fields.corruptSignature) issued.der.back() ^= std::byte{1};
+    return issued;
+}
+
+std::vector<Data> IssuedChain::list(bool withRoot) const {
+    std::vector<Data> certificates{leaf.der, intermediate.der};
+    if (withRoot) certificates.push_back(root.der);
+    return certificates;
+}
+
+IssuedChain ChainFields::issue() const {
+    IssuedCertificate top = issueCertificate(root, nullptr);
+    IssuedCertificate middle = issueCertificate(intermediate, &top);
+    IssuedCertificate bottom = issueCertificate(leaf, &middle);
+    return {std::move(top), std::move(middle), std::move(bottom)};
+}
+
+namespace {
+
+void makeAuthorities(ChainFields& chain, const std::string& purpose) {
+    chain.root.subject = {{"O", "Ostrel"}, {"CN", purpose + " Root"}};
+    chain.root.key = SigningKey::cached(KeyKind::p256, purpose + " Root");
+    chain.root.basicConstraints = BasicConstraints{true};
+    chain.root.keyUsage = "critical,keyCertSign,cRLSign";
+    chain.root.serial = 1;
+
+    chain.intermediate.subject = {{"O", "Ostrel"}, {"CN", purpose + " Intermediate"}};
+    chain.intermediate.key = SigningKey::cached(KeyKind::p256, purpose + " Intermediate");
+    chain.intermediate.basicConstraints = BasicConstraints{true, 0};
+    chain.intermediate.keyUsage = "critical,keyCertSign,cRLSign";
+    chain.intermediate.serial = 2;
+
+    chain.leaf.key = SigningKey::cached(KeyKind::p256, purpose + " Leaf");
+    chain.leaf.keyUsage = "critical,digitalSignature";
+    chain.leaf.serial = 3;
+}
+
+bool isAddress(const std::string& host) {
+    in6_addr address{};
+    return inet_pton(AF_INET, host.c_str(), &address) == 1 ||
+           inet_pton(AF_INET6, host.c_str(), &address) == 1;
+}
+
+}  // namespace
+
+TicketChain::TicketChain() {
+    makeAuthorities(*this, "Ticket");
+    intermediate.markers = {kTicketIntermediateMarker};
+    leaf.subject = {{"O", "Ostrel"}, {"CN", "Ticket Signer"}};
+    leaf.markers = {kTicketLeafMarker};
+}
+
+ServerChain::ServerChain(const std::string& host) {
+    makeAuthorities(*this, "Server");
+    leaf.subject = {{"O", "Ostrel"}, {"CN", "Record Service"}};
+    leaf.extendedKeyUsage = "serverAuth";
+    leaf.subjectAlternativeNames = (isAddress(host) ? "IP:" : "DNS:") + host;
+    leaf.markers = {kPinnedServerMarker};
+}
+
+}  // namespace pinwell::test

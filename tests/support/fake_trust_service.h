@@ -1,0 +1,137 @@
+// A trust service whose every answer is set by the test, and which records what it was asked.
+//
+//   FakeTrustService service;
+//   service.evaluations = {{.verdict = trust::Verdict::recoverableFailure}, {}};   // refuses once, then
+//   accepts
+//   ... run what is under test ...
+//   EXPECT_EQ(service.policies.size(), 2U);
+//
+// The service must outlive the trust objects it makes. Not for use from several threads at once.
+#pragma once
+
+#include <algorithm>
+#include <functional>
+#include <memory>
+#include <optional>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "trust/trust.h"
+
+namespace pinwell::test {
+
+/// A certificate that is whatever bytes it was made from.
+class FakeCertificate : public trust::Certificate {
+  public:
+    explicit FakeCertificate(foundation::ByteView der, std::string summary = "certificate")
+        : der_(foundation::toData(der)), summary_(std::move(summary)) {}
+
+    const foundation::Data& der() const override { return der_; }
+    std::string subjectSummary() const override { return summary_; }
+
+  private:
+    foundation::Data der_;
+    std::string summary_;
+};
+
+class FakePublicKey : public trust::PublicKey {};
+
+class FakeTrustService : public trust::TrustService {
+  public:
+    /// What one call of evaluate() does, and what the trust object tells afterwards.
+    struct Evaluation {
+        trust::Status status = trust::kSuccess;
+        trust::Verdict verdict = trust::Verdict::unspecified;
+        trust::Array properties = {};
+        std::optional<std::string> failureDescription = std::nullopt;
+    };
+    struct SignatureCheck {
+        foundation::Data message;
+        foundation::Data signature;
+    };
+
+    // Answers. Of a list, each call takes the next entry and the last one stays; an empty list is success.
+    std::function<bool(foundation::ByteView)> parsesCertificate = [](foundation::ByteView) { return true; };
+    trust::NamedPolicyOutcome namedPolicyOutcome = trust::NamedPolicyOutcome::unavailable;
+    trust::PolicyRef namedPolicy;
+    trust::Status createTrustStatus = trust::kSuccess;
+    bool createsTrustObject = true;
+    std::vector<trust::Status> setPolicyStatuses;
+    std::vector<Evaluation> evaluations;
+    trust::PublicKeyRef publicKey = std::make_shared<FakePublicKey>();
+    std::optional<trust::Error> signatureError;
+
+    // Records, in the order of the calls.
+    std::vector<foundation::Data> parsedCertificates;
+    std::vector<std::string> namedPolicyRequests;
+    std::vector<std::vector<foundation::Data>> certificateLists;  // of createTrust
+    std::vector<trust::PolicyRef> policies;                       // of createTrust and setPolicy
+    std::size_t evaluationCount = 0;
+    std::vector<SignatureCheck> signatureChecks;
+
+    trust::CertificateRef createCertificate(foundation::ByteView der) override {
+        parsedCertificates.push_back(foundation::toData(der));
+        return parsesCertificate(der) ? std::make_shared<FakeCertificate>(der) : nullptr;
+    }
+
+    trust::NamedPolicyOutcome createNamedPolicy(const std::string& constructorName,
+                                                trust::PolicyRef& policy) override {
+        namedPolicyRequests.push_back(constructorName);
+        policy = namedPolicyOutcome == trust::NamedPolicyOutcome::created ? namedPolicy : nullptr;
+        return namedPolicyOutcome;
+    }
+
+    trust::Status createTrust(std::vector<trust::CertificateRef> certificates, trust::PolicyRef policy,
+                              std::shared_ptr<trust::Trust>& trust) override {
+        auto& list = certificateLists.emplace_back();
+        for (const auto& certificate : certificates) list.push_back(certificate->der());
+        policies.push_back(std::move(policy));
+        trust = createTrustStatus == trust::kSuccess && createsTrustObject ? makeTrust() : nullptr;
+        return createTrustStatus;
+    }
+
+    std::optional<trust::Error> verifySignature(const trust::PublicKey&, foundation::ByteView message,
+                                                foundation::ByteView signature) override {
+        signatureChecks.push_back({foundation::toData(message), foundation::toData(signature)});
+        return signatureError;
+    }
+
+    /// A trust object as an HTTPS challenge carries one: it was not made by createTrust.
+    std::shared_ptr<trust::Trust> makeTrust() { return std::make_shared<FakeTrust>(*this); }
+
+  private:
+    class FakeTrust : public trust::Trust {
+      public:
+        explicit FakeTrust(FakeTrustService& service) : service_(service) {}
+
+        trust::Status setPolicy(trust::PolicyRef policy) override {
+            service_.policies.push_back(std::move(policy));
+            last_.reset();
+            return pick(service_.setPolicyStatuses, service_.setPolicyCount_++);
+        }
+        trust::Status evaluate(trust::Verdict& verdict) override {
+            last_ = pick(service_.evaluations, service_.evaluationCount++);
+            if (last_->status == trust::kSuccess) verdict = last_->verdict;
+            return last_->status;
+        }
+        trust::Array copyProperties() const override { return last_ ? last_->properties : trust::Array{}; }
+        std::optional<std::string> copyFailureDescription() const override {
+            return last_ ? last_->failureDescription : std::nullopt;
+        }
+        trust::PublicKeyRef copyPublicKey() const override { return last_ ? service_.publicKey : nullptr; }
+
+      private:
+        template <class T>
+        static T pick(const std::vector<T>& answers, std::size_t index) {
+            return answers.empty() ? T{} : answers[std::min(index, answers.size() - 1)];
+        }
+
+        FakeTrustService& service_;
+        std::optional<Evaluation> last_;
+    };
+
+    std::size_t setPolicyCount_ = 0;
+};
+
+}  // namespace pinwell::test
