@@ -137,7 +137,9 @@ URL URL::appendingPathComponent(std::string_view component) const {
         return url;
     }
     const std::size_t pathEnd = std::min(text_.find_first_of("?#"), text_.size());
-    const std::string added = (path_.ends_with('/') ? "" : "/") + percentEncodePath(component);
+    std::string added;
+    if (!path_.ends_with('/')) added += '/';
+    added += percentEncodePath(component);
     url.text_.insert(pathEnd, added);
     url.path_ += added;
     return url;
