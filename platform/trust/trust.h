@@ -1,7 +1,8 @@
-// The certificate-trust service: certificates, policies that are lists of options, trust objects and their verdict.
+// The certificate-trust service: certificates, policies that are lists of options, trust objects and their
+// verdict.
 //
-// A policy is its options and nothing more: what the list does not name is not checked. All calls block and may be
-// made from any thread; one trust object serves one thread at a time.
+// A policy is its options and nothing more: what the list does not name is not checked. All calls block and
+// may be made from any thread; one trust object serves one thread at a time.
 #pragma once
 
 #include <cstdint>
@@ -30,6 +31,7 @@ using foundation::Error;
 using Status = std::int32_t;
 inline constexpr Status kSuccess = 0;
 inline constexpr Status kParameterError = -50;
+inline constexpr Status kSignatureError = -67688;  // a signature did not verify
 
 /// Verdict numbers of an evaluation.
 enum class Verdict : std::uint32_t {
@@ -49,7 +51,8 @@ class Certificate {
 
     virtual const Data& der() const = 0;
 
-    /// What a person knows it by: the subject's common name, else its last named part, else its key identifier.
+    /// What a person knows it by: the subject's common name, else its last named part, else its key
+    /// identifier.
     virtual std::string subjectSummary() const = 0;
 };
 using CertificateRef = std::shared_ptr<const Certificate>;
@@ -61,20 +64,26 @@ class PublicKey {
 };
 using PublicKeyRef = std::shared_ptr<const PublicKey>;
 
-/// Option keys. The value's type stands behind each; `true` switches a check on.
+/// Option keys. The value's type stands behind each; `true` switches a check on. An option that is not among
+/// these, or whose value is of another type, makes the verdict otherError. Without an anchor option the
+/// anchors are those of kPlatformAnchor. Certificates are checked root included; of a list of marker OIDs all
+/// must be there.
 namespace option {
-inline constexpr std::string_view kCriticalExtensions = "CriticalExtensions";      // true
-inline constexpr std::string_view kIdLinkage = "IdLinkage";                        // true
-inline constexpr std::string_view kBasicConstraints = "BasicConstraints";          // true
-inline constexpr std::string_view kNonEmptySubject = "NonEmptySubject";            // true
-inline constexpr std::string_view kPlatformAnchor = "PlatformAnchor";              // dictionary of sub-options, may be empty
-inline constexpr std::string_view kCompatibilityAnchor = "CompatibilityAnchor";    // the same, compat-roots/ besides
-inline constexpr std::string_view kChainLength = "ChainLength";                    // number, leaf and root counted
-inline constexpr std::string_view kIntermediateMarkerOid = "IntermediateMarkerOid";  // dotted OID, or a list of them
-inline constexpr std::string_view kLeafMarkerOid = "LeafMarkerOid";                // dotted OID, or a list of them
-inline constexpr std::string_view kKeySize = "KeySize";                            // key type -> minimum bits
-inline constexpr std::string_view kValidityDates = "ValidityDates";                // true
-inline constexpr std::string_view kHostName = "HostName";                          // DNS name or IP address
+inline constexpr std::string_view kCriticalExtensions = "CriticalExtensions";  // true
+inline constexpr std::string_view kIdLinkage = "IdLinkage";                    // true
+inline constexpr std::string_view kBasicConstraints = "BasicConstraints";      // true
+inline constexpr std::string_view kNonEmptySubject = "NonEmptySubject";        // true
+inline constexpr std::string_view kPlatformAnchor =
+    "PlatformAnchor";  // dictionary of sub-options, may be empty
+inline constexpr std::string_view kCompatibilityAnchor =
+    "CompatibilityAnchor";                                       // the same, compat-roots/ besides
+inline constexpr std::string_view kChainLength = "ChainLength";  // number, leaf and root counted
+inline constexpr std::string_view kIntermediateMarkerOid =
+    "IntermediateMarkerOid";                                         // dotted OID, or a list of them
+inline constexpr std::string_view kLeafMarkerOid = "LeafMarkerOid";  // dotted OID, or a list of them
+inline constexpr std::string_view kKeySize = "KeySize";              // key type -> minimum bits
+inline constexpr std::string_view kValidityDates = "ValidityDates";  // true
+inline constexpr std::string_view kHostName = "HostName";            // DNS name or IP address
 inline constexpr std::string_view kServerAuthentication = "ServerAuthentication";  // true
 }  // namespace option
 
@@ -139,13 +148,17 @@ class TrustService {
     /// A policy from the platform security library's argument-less constructor of that name.
     virtual NamedPolicyOutcome createNamedPolicy(const std::string& constructorName, PolicyRef& policy) = 0;
 
-    /// Leaf first. Certificates behind the leaf are candidates for its chain, in any number up to a named limit.
+    /// Leaf first. Certificates behind the leaf are candidates for its chain in any order; those that are of
+    /// no use are passed over. kParameterError for an empty list, one of more than 64, and certificates of
+    /// another service.
     virtual Status createTrust(std::vector<CertificateRef> certificates, PolicyRef policy,
                                std::shared_ptr<Trust>& trust) = 0;
 
-    /// ECDSA in X9.62 form over SHA-256 of `message`. The signature is the DER element at the front of `signature`;
-    /// whatever stands behind it must be zero. Nothing when it verifies.
-    virtual std::optional<Error> verifySignature(const PublicKey& key, ByteView message, ByteView signature) = 0;
+    /// The error is kSignatureError of the OS-status domain. ECDSA in X9.62 form over SHA-256 of `message`.
+    /// The signature is the DER element at the front of `signature`; whatever stands behind it must be zero.
+    /// Nothing when it verifies.
+    virtual std::optional<Error> verifySignature(const PublicKey& key, ByteView message,
+                                                 ByteView signature) = 0;
 };
 
 /// The service over the platform directory's anchors, read once on first need. `now` is the evaluation time.

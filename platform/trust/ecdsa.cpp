@@ -1,0 +1,54 @@
+#include "trust/ecdsa.h"
+
+#include <algorithm>
+
+#include "foundation/byte_reader.h"
+#include "trust/der.h"
+#include "trust/openssl_handles.h"
+
+namespace pinwell::trust {
+namespace {
+
+using DigestContext = Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
+
+constexpr std::uint8_t kSignBit = 0x80;
+
+bool isPositiveInteger(const der::Element& element) {
+    if (element.tag != der::kInteger || element.contents.empty()) return false;
+    foundation::ByteReader reader(element.contents);
+    const std::uint8_t first = reader.u8("integer");
+    if (first != 0) return (first & kSignBit) == 0;
+    return !reader.atEnd() && (reader.u8("integer") & kSignBit) != 0;  // else zero, or not the shortest form
+}
+
+/// The DER element at the front of the field; empty when the field is not as it should be.
+ByteView signatureElement(ByteView field) {
+    const std::optional<der::Element> sequence = der::readElement(field);
+    if (!sequence || sequence->tag != der::kConstructedSequence) return {};
+    const ByteView padding = field.subspan(sequence->whole.size());
+    if (std::any_of(padding.begin(), padding.end(), [](std::byte byte) { return byte != std::byte{0}; }))
+        return {};
+
+    const std::optional<der::Element> r = der::readElement(sequence->contents);
+    if (!r || !isPositiveInteger(*r)) return {};
+    const ByteView rest = sequence->contents.subspan(r->whole.size());
+    const std::optional<der::Element> s = der::readElement(rest);
+    if (!s || !isPositiveInteger(*s) || s->whole.size() != rest.size()) return {};
+    return sequence->whole;
+}
+
+}  // namespace
+
+bool verifyEcdsa(const X509PublicKey& key, ByteView message, ByteView field) {
+    if (key.type() != kKeyTypeEllipticCurve) return false;
+    const ByteView signature = signatureElement(field);
+    if (signature.empty()) return false;
+    const ErrorQueueGuard guard;
+    const DigestContext context(EVP_MD_CTX_new());
+    return context &&
+           EVP_DigestVerifyInit(context.get(), nullptr, EVP_sha256(), nullptr, key.native()) == 1 &&
+           EVP_DigestVerify(context.get(), unsignedBytes(signature), signature.size(), unsignedBytes(message),
+                            message.size()) == 1;
+}
+
+}  // namespace pinwell::trust

@@ -1,0 +1,51 @@
+// Owning handles of OpenSSL objects. For the .cpp files of this folder only.
+#pragma once
+
+#include <openssl/asn1.h>
+#include <openssl/bio.h>
+#include <openssl/err.h>
+#include <openssl/evp.h>
+#include <openssl/x509.h>
+#include <openssl/x509v3.h>
+
+#include <memory>
+
+#include "foundation/bytes.h"
+
+namespace pinwell::trust {
+
+template <auto release>
+struct Releaser {
+    template <class T>
+    void operator()(T* object) const noexcept {
+        release(object);
+    }
+};
+template <class T, auto release>
+using Handle = std::unique_ptr<T, Releaser<release>>;
+
+/// Leaves OpenSSL's error queue of this thread as it was found: a TLS session of the same thread reads that
+/// queue too, and would take our refusals for its own.
+class ErrorQueueGuard {
+  public:
+    ErrorQueueGuard() { ERR_set_mark(); }
+    ~ErrorQueueGuard() { ERR_pop_to_mark(); }
+    ErrorQueueGuard(const ErrorQueueGuard&) = delete;
+    ErrorQueueGuard& operator=(const ErrorQueueGuard&) = delete;
+};
+
+inline const unsigned char* unsignedBytes(foundation::ByteView bytes) {
+    return static_cast<const unsigned char*>(static_cast<const void*>(bytes.data()));
+}
+
+inline foundation::ByteView byteView(const unsigned char* bytes, int length) {
+    if (bytes == nullptr || length <= 0) return {};
+    return {static_cast<const std::byte*>(static_cast<const void*>(bytes)), static_cast<std::size_t>(length)};
+}
+
+inline foundation::ByteView byteView(const ASN1_STRING* string) {
+    if (string == nullptr) return {};
+    return byteView(ASN1_STRING_get0_data(string), ASN1_STRING_length(string));
+}
+
+}  // namespace pinwell::trust

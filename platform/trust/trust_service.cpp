@@ -1,0 +1,197 @@
+#include "trust/trust_service.h"
+
+#include <algorithm>
+#include <mutex>
+
+#include "foundation/format.h"
+#include "trust/chain_builder.h"
+#include "trust/ecdsa.h"
+#include "trust/named_policy.h"
+#include "trust/policy_checks.h"
+#include "trust/requirements.h"
+
+namespace pinwell::trust {
+namespace {
+
+/// What evaluations share: the anchors, read on first need, and the clock.
+class Environment {
+  public:
+    Environment(std::function<Anchors()> load, std::function<Date()> now)
+        : load_(std::move(load)), now_(std::move(now)) {}
+
+    const Anchors& anchors() {
+        std::call_once(loaded_, [this] {
+            anchors_ = load_();
+            platformAndCompatibility_ = anchors_.roots;
+            platformAndCompatibility_.insert(platformAndCompatibility_.end(), anchors_.compatibility.begin(),
+                                             anchors_.compatibility.end());
+        });
+        return anchors_;
+    }
+
+    const CertificateList& platformAnchors(AnchorSet set) {
+        const CertificateList& roots = anchors().roots;
+        return set == AnchorSet::platform ? roots : platformAndCompatibility_;
+    }
+
+    Date now() const { return now_(); }
+
+  private:
+    std::function<Anchors()> load_;
+    std::function<Date()> now_;
+    std::once_flag loaded_;
+    Anchors anchors_;
+    CertificateList platformAndCompatibility_;
+};
+
+/// A chain and what was found wrong with it.
+struct Judgement {
+    CandidateChain chain;
+    std::vector<Failure> failures;
+
+    Verdict verdict() const {
+        if (!failures.empty()) return failures.front().verdict;
+        return chain.anchoring == Anchoring::platform ? Verdict::unspecified : Verdict::proceed;
+    }
+
+    /// Which of two chains for the same leaf to go by. Of the bad ones, one that the user distrusts says most
+    /// about why the leaf is refused, then one that ends where it should.
+    int rank() const {
+        switch (verdict()) {
+            case Verdict::unspecified:
+                return 5;
+            case Verdict::proceed:
+                return 4;
+            case Verdict::deny:
+                return 3;
+            default:
+                return chain.anchoring == Anchoring::none ? 1 : 2;
+        }
+    }
+};
+
+Judgement judge(const CertificateList& given, const Requirements& requirements, Environment& environment) {
+    Judgement best;
+    const Date now = environment.now();
+    ChainBuilder builder(given, environment.platformAnchors(requirements.anchors), environment.anchors());
+    builder.build([&](const CandidateChain& chain) {
+        Judgement judgement{chain, checkChain(chain, requirements, now)};
+        if (best.chain.certificates.empty() || judgement.rank() > best.rank()) best = std::move(judgement);
+        return best.verdict() == Verdict::unspecified;
+    });
+    return best;
+}
+
+class ChainTrust final : public Trust {
+  public:
+    ChainTrust(std::shared_ptr<Environment> environment, CertificateList certificates, PolicyRef policy)
+        : environment_(std::move(environment)),
+          certificates_(std::move(certificates)),
+          policy_(std::move(policy)) {}
+
+    Status setPolicy(PolicyRef policy) override {
+        if (!policy) return kParameterError;
+        policy_ = std::move(policy);
+        judgement_.reset();
+        policyError_.reset();
+        return kSuccess;
+    }
+
+    Status evaluate(Verdict& verdict) override {
+        judgement_.reset();
+        policyError_.reset();
+        const foundation::Result<Requirements> requirements = readRequirements(policy_->options);
+        if (!requirements) {
+            policyError_ = requirements.error().localizedFailureReason();
+            verdict = Verdict::otherError;
+            return kSuccess;
+        }
+        judgement_ = judge(certificates_, *requirements, *environment_);
+        verdict = judgement_->verdict();
+        return kSuccess;
+    }
+
+    Array copyProperties() const override {
+        Array properties;
+        if (!judgement_) return properties;
+        const CertificateList& chain = judgement_->chain.certificates;
+        for (std::size_t i = 0; i < chain.size(); ++i) {
+            Dictionary entry;
+            entry.emplace(kPropertyTitle, chain[i]->subjectSummary());
+            const auto failure = std::find_if(judgement_->failures.begin(), judgement_->failures.end(),
+                                              [&](const Failure& one) { return one.certificate == i; });
+            if (failure != judgement_->failures.end()) entry.emplace(kPropertyError, failure->reason);
+            properties.emplace_back(std::move(entry));
+        }
+        return properties;
+    }
+
+    std::optional<std::string> copyFailureDescription() const override {
+        if (policyError_) return foundation::format("Policy %@: %@", policy_->oid, *policyError_);
+        if (!judgement_ || judgement_->failures.empty()) return std::nullopt;
+        const Failure& failure = judgement_->failures.front();
+        return foundation::format("Certificate \"%@\": %@",
+                                  judgement_->chain.certificates[failure.certificate]->subjectSummary(),
+                                  failure.reason);
+    }
+
+    PublicKeyRef copyPublicKey() const override {
+        return judgement_ ? judgement_->chain.certificates.front()->publicKey() : nullptr;
+    }
+
+  private:
+    std::shared_ptr<Environment> environment_;
+    CertificateList certificates_;
+    PolicyRef policy_;
+    std::optional<Judgement> judgement_;
+    std::optional<std::string> policyError_;
+};
+
+class X509TrustService final : public TrustService {
+  public:
+    X509TrustService(std::shared_ptr<Environment> environment, std::string securityLibrary)
+        : environment_(std::move(environment)), securityLibrary_(std::move(securityLibrary)) {}
+
+    CertificateRef createCertificate(ByteView der) override { return X509Certificate::parse(der); }
+
+    NamedPolicyOutcome createNamedPolicy(const std::string& constructorName, PolicyRef& policy) override {
+        return trust::createNamedPolicy(securityLibrary_, constructorName, policy);
+    }
+
+    Status createTrust(std::vector<CertificateRef> certificates, PolicyRef policy,
+                       std::shared_ptr<Trust>& trust) override {
+        trust = nullptr;
+        if (certificates.empty() || certificates.size() > kMaximumCertificates || !policy)
+            return kParameterError;
+        CertificateList list;
+        for (const CertificateRef& certificate : certificates) {
+            X509CertificateRef ours = std::dynamic_pointer_cast<const X509Certificate>(certificate);
+            if (!ours) return kParameterError;
+            list.push_back(std::move(ours));
+        }
+        trust = std::make_shared<ChainTrust>(environment_, std::move(list), std::move(policy));
+        return kSuccess;
+    }
+
+    std::optional<Error> verifySignature(const PublicKey& key, ByteView message,
+                                         ByteView signature) override {
+        const auto* const ours = dynamic_cast<const X509PublicKey*>(&key);
+        if (ours == nullptr) return Error::osStatus(kParameterError);
+        if (verifyEcdsa(*ours, message, signature)) return std::nullopt;
+        return Error(foundation::kOSStatusErrorDomain, kSignatureError, "The signature does not verify.");
+    }
+
+  private:
+    std::shared_ptr<Environment> environment_;
+    std::string securityLibrary_;
+};
+
+}  // namespace
+
+std::unique_ptr<TrustService> makeTrustService(std::function<Anchors()> loadAnchors,
+                                               std::function<Date()> now, std::string securityLibrary) {
+    return std::make_unique<X509TrustService>(
+        std::make_shared<Environment>(std::move(loadAnchors), std::move(now)), std::move(securityLibrary));
+}
+
+}  // namespace pinwell::trust
