@@ -58,29 +58,27 @@ bool ChainBuilder::extend(CertificateList& chain, const std::function<bool(const
 }
 
 /// Certificates that could stand next in the chain, best first. One whose key does not verify the signature
-/// is among them only when there is no other, so that the chain can be shown with what is wrong in it.
+/// is shown only when no certificate's key does, so that the chain can be seen with what is wrong in it; and
+/// not when its key identifier differs as well, for then it merely has the same name.
 std::vector<ChainBuilder::Issuer> ChainBuilder::issuersFor(const CertificateList& chain) {
     const X509CertificateRef& issued = chain.back();
     std::vector<Issuer> issuers;
+    bool hasIssuer = false;
     for (const X509CertificateRef& candidate : candidates_) {
         if (!candidate->isNamedAsIssuerOf(*issued)) continue;
+        const Issuer issuer{candidate, verifies(candidate, issued),
+                            identifierPreference(*candidate, *issued)};
+        hasIssuer = hasIssuer || issuer.verifies;  // a self-signed certificate has one: itself
+        if (!issuer.verifies && issuer.preference == identifierDiffers) continue;
         const bool repeats = std::any_of(chain.begin(), chain.end(), [&](const X509CertificateRef& member) {
             return member->der() == candidate->der() || member->hasSameSubjectAndKeyAs(*candidate);
         });
-        if (repeats) continue;
-        issuers.push_back(
-            {candidate, verifies(candidate, issued), identifierPreference(*candidate, *issued)});
+        if (!repeats) issuers.push_back(issuer);
     }
-    std::stable_sort(issuers.begin(), issuers.end(), [](const Issuer& a, const Issuer& b) {
-        return a.verifies != b.verifies ? a.verifies : a.preference > b.preference;
-    });
-    const auto unverified =
-        std::find_if(issuers.begin(), issuers.end(), [](const Issuer& issuer) { return !issuer.verifies; });
-    if (unverified == issuers.begin()) {
-        if (issuers.size() > 1) issuers.erase(issuers.begin() + 1, issuers.end());
-    } else {
-        issuers.erase(unverified, issuers.end());
-    }
+    if (hasIssuer) std::erase_if(issuers, [](const Issuer& issuer) { return !issuer.verifies; });
+    std::stable_sort(issuers.begin(), issuers.end(),
+                     [](const Issuer& a, const Issuer& b) { return a.preference > b.preference; });
+    if (!hasIssuer && issuers.size() > 1) issuers.erase(issuers.begin() + 1, issuers.end());
     return issuers;
 }
 

@@ -57,6 +57,10 @@ class SigningKey {
 /// Attribute short name and value, in order: {{"O", "Ostrel"}, {"CN", "Root"}}. May be empty.
 using DistinguishedName = std::vector<std::pair<std::string, std::string>>;
 
+inline DistinguishedName commonName(std::string name) {
+    return {{"CN", std::move(name)}};
+}
+
 struct BasicConstraints {
     bool isCertificateAuthority = false;
     std::optional<int> pathLength = std::nullopt;

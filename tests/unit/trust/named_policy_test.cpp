@@ -1,0 +1,171 @@
+#include "trust/named_policy.h"
+
+#include <gtest/gtest.h>
+#include <stdio.h>
+
+#include <array>
+
+#include "scene.h"
+#include "trust/include/pinwell/ostrel_security.h"
+
+namespace pinwell::trust {
+namespace {
+
+constexpr const char* kConstructor = "SecPolicyCreateOstrelQuillonPlusTicket";
+
+NamedPolicyOutcome lookUp(const std::string& sort, PolicyRef& policy) {
+    return createNamedPolicy(std::string(SECURITY_LIBRARIES) + "/" + sort + "/libostrelsecurity.so.1",
+                             kConstructor, policy);
+}
+NamedPolicyOutcome lookUp(const std::string& sort) {
+    PolicyRef policy = std::make_shared<const Policy>();
+    const NamedPolicyOutcome outcome = lookUp(sort, policy);
+    EXPECT_EQ(policy != nullptr, outcome == NamedPolicyOutcome::created);
+    return outcome;
+}
+
+std::string probe(const std::string& directory) {
+    const std::string command = "LD_LIBRARY_PATH='" + directory + "' '" + NAMED_POLICY_PROBE + "'";
+    FILE* const pipe = popen(command.c_str(), "r");
+    std::array<char, 256> line{};
+    const std::size_t size = fread(line.data(), 1, line.size(), pipe);
+    EXPECT_EQ(pclose(pipe), 0);
+    return {line.data(), size};
+}
+
+TEST(NamedPolicy, IsCopiedFromTheLibrary) {
+    PolicyRef policy;
+    ASSERT_EQ(lookUp("good", policy), NamedPolicyOutcome::created);
+    EXPECT_EQ(policy->oid, "1.2.840.177245.100.1.90");
+    EXPECT_EQ(policy->name, "ticket signing");
+    const Dictionary expected{{"CriticalExtensions", true},
+                              {"ChainLength", 3},
+                              {"IntermediateMarkerOid", "1.2.840.177245.100.6.2.17"},
+                              {"LeafMarkerOid", Array{"1.2.840.177245.100.6.1.30"}},
+                              {"KeySize", Dictionary{{"RSA", 2048}, {"EC", 256}}},
+                              {"PlatformAnchor", Dictionary{}}};
+    EXPECT_EQ(policy->options, expected);
+}
+
+TEST(NamedPolicy, JudgesChains) {
+    PolicyRef policy;
+    ASSERT_EQ(lookUp("good", policy), NamedPolicyOutcome::created);
+    EXPECT_EQ(Scene(test::TicketChain()).verdict(*policy), Verdict::unspecified);
+    EXPECT_EQ(Scene(test::ServerChain()).verdict(*policy), Verdict::recoverableFailure);
+}
+
+TEST(NamedPolicy, OfAnAbsentLibraryIsUnavailable) {
+    EXPECT_EQ(lookUp("absent"), NamedPolicyOutcome::unavailable);
+}
+
+TEST(NamedPolicy, ThatTheLibraryDoesNotKnowIsUnavailable) {
+    EXPECT_EQ(lookUp("nameless"), NamedPolicyOutcome::unavailable);
+}
+
+TEST(NamedPolicy, ThatIsNullIsARefusal) {
+    EXPECT_EQ(lookUp("refusing"), NamedPolicyOutcome::refused);
+}
+TEST(NamedPolicy, OfAnotherVersionIsARefusal) {
+    EXPECT_EQ(lookUp("future"), NamedPolicyOutcome::refused);
+}
+TEST(NamedPolicy, WithAValueOfUnknownTypeIsARefusal) {
+    EXPECT_EQ(lookUp("wrong_type"), NamedPolicyOutcome::refused);
+}
+
+TEST(NamedPolicy, WithAnUnknownOptionTrustsNothing) {
+    PolicyRef policy;
+    ASSERT_EQ(lookUp("unknown_option", policy), NamedPolicyOutcome::created);
+    EXPECT_EQ(Scene(test::TicketChain()).verdict(*policy), Verdict::otherError);
+}
+
+TEST(NamedPolicy, IsFoundByTheDynamicLoadersRules) {
+    EXPECT_EQ(probe(std::string(SECURITY_LIBRARIES) + "/good"), "created 1.2.840.177245.100.1.90");
+    EXPECT_EQ(probe(std::string(SECURITY_LIBRARIES) + "/refusing"), "refused");
+    EXPECT_EQ(probe(std::string(SECURITY_LIBRARIES) + "/nameless"), "unavailable");
+    EXPECT_EQ(probe("/nonexistent"), "unavailable");
+}
+
+/// A policy object with one option, to be spoilt.
+struct Object {
+    ostrel_policy_option option{"ChainLength", OSTREL_OPTION_NUMBER, 0, {}};
+    ostrel_policy policy{OSTREL_POLICY_VERSION, 1, "1.2.3", nullptr, &option, nullptr};
+
+    Object() { option.value.number = 3; }
+};
+
+TEST(NamedPolicyObject, MayBeWithoutAName) {
+    const Object object;
+    const PolicyRef policy = convertPolicy(object.policy);
+    ASSERT_TRUE(policy);
+    EXPECT_EQ(policy->name, std::nullopt);
+}
+
+TEST(NamedPolicyObject, NeedsAnOid) {
+    Object object;
+    object.policy.oid = nullptr;
+    EXPECT_FALSE(convertPolicy(object.policy));
+}
+
+TEST(NamedPolicyObject, NeedsItsOptions) {
+    Object object;
+    object.policy.options = nullptr;
+    EXPECT_FALSE(convertPolicy(object.policy));
+}
+
+TEST(NamedPolicyObject, NeedsKeys) {
+    Object object;
+    object.option.key = nullptr;
+    EXPECT_FALSE(convertPolicy(object.policy));
+}
+
+TEST(NamedPolicyObject, HasALimitOnOptions) {
+    Object object;
+    object.policy.option_count = OSTREL_MAXIMUM_OPTIONS + 1;
+    EXPECT_FALSE(convertPolicy(object.policy));
+}
+
+TEST(NamedPolicyObject, HasALimitOnEntries) {
+    Object object;
+    object.option.type = OSTREL_OPTION_STRING_LIST;
+    object.option.count = OSTREL_MAXIMUM_ENTRIES + 1;
+    EXPECT_FALSE(convertPolicy(object.policy));
+}
+
+TEST(NamedPolicyObject, HasALimitOnStrings) {
+    Object object;
+    const std::string longest(OSTREL_MAXIMUM_STRING, 'x');
+    object.policy.oid = longest.c_str();
+    EXPECT_TRUE(convertPolicy(object.policy));
+    const std::string tooLong(OSTREL_MAXIMUM_STRING + 1, 'x');
+    object.policy.oid = tooLong.c_str();
+    EXPECT_FALSE(convertPolicy(object.policy));
+}
+
+TEST(NamedPolicyObject, NeedsTheListThatItCounts) {
+    for (const std::uint32_t type :
+         {std::uint32_t{OSTREL_OPTION_STRING_LIST}, std::uint32_t{OSTREL_OPTION_NUMBER_DICTIONARY}}) {
+        Object object;
+        object.option.type = type;
+        object.option.count = 1;
+        object.option.value.strings = nullptr;
+        EXPECT_FALSE(convertPolicy(object.policy));
+    }
+}
+
+TEST(NamedPolicyObject, HasNoKeyTwice) {
+    const Object object;
+    const std::array twice{object.option, object.option};
+    ostrel_policy policy = object.policy;
+    policy.options = twice.data();
+    policy.option_count = 2;
+    EXPECT_FALSE(convertPolicy(policy));
+}
+
+TEST(NamedPolicyObject, HasBooleansThatAreZeroOrOne) {
+    Object object;
+    object.option.type = OSTREL_OPTION_BOOLEAN;
+    EXPECT_FALSE(convertPolicy(object.policy));
+}
+
+}  // namespace
+}  // namespace pinwell::trust

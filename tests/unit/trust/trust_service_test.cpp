@@ -1,0 +1,216 @@
+#include "trust/trust_service.h"
+
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <thread>
+
+#include "scene.h"
+#include "support/fake_trust_service.h"
+
+namespace pinwell::trust {
+namespace {
+
+using test::TicketChain;
+
+Scene brokenLeaf() {
+    TicketChain chain;
+    chain.leaf.markers.clear();
+    return Scene(chain);
+}
+
+TEST(Trust, NamesTheCertificateAtFaultAndTheReason) {
+    const auto trust = brokenLeaf().trust(ticketPolicy());
+    Verdict verdict{};
+    trust->evaluate(verdict);
+    EXPECT_EQ(trust->copyFailureDescription(),
+              "Certificate \"Ticket Signer\": the leaf marker 1.2.840.177245.100.6.1.30 is missing");
+}
+
+TEST(Trust, HasPropertiesForEachCertificateOfTheChain) {
+    const auto trust = brokenLeaf().trust(ticketPolicy());
+    Verdict verdict{};
+    trust->evaluate(verdict);
+    const Array expected{Dictionary{{"title", "Ticket Signer"},
+                                    {"error", "the leaf marker 1.2.840.177245.100.6.1.30 is missing"}},
+                         Dictionary{{"title", "Ticket Intermediate"}}, Dictionary{{"title", "Ticket Root"}}};
+    EXPECT_EQ(trust->copyProperties(), expected);
+}
+
+TEST(Trust, HasNothingToSayAfterSuccess) {
+    const auto trust = Scene(TicketChain()).trust(ticketPolicy());
+    Verdict verdict{};
+    trust->evaluate(verdict);
+    EXPECT_EQ(trust->copyFailureDescription(), std::nullopt);
+    EXPECT_EQ(trust->copyProperties().size(), 3U);
+}
+
+TEST(Trust, HasNeitherKeyNorPropertiesBeforeItsEvaluation) {
+    const auto trust = brokenLeaf().trust(ticketPolicy());
+    EXPECT_EQ(trust->copyPublicKey(), nullptr);
+    EXPECT_TRUE(trust->copyProperties().empty());
+    EXPECT_EQ(trust->copyFailureDescription(), std::nullopt);
+}
+
+TEST(Trust, ForgetsItsVerdictWithANewPolicy) {
+    const auto trust = brokenLeaf().trust(ticketPolicy());
+    Verdict verdict{};
+    trust->evaluate(verdict);
+    Policy lenient = ticketPolicy();
+    lenient.options.erase(std::string(option::kLeafMarkerOid));
+    EXPECT_EQ(trust->setPolicy(std::make_shared<const Policy>(lenient)), kSuccess);
+    EXPECT_EQ(trust->copyFailureDescription(), std::nullopt);
+    EXPECT_EQ(trust->copyPublicKey(), nullptr);
+    trust->evaluate(verdict);
+    EXPECT_EQ(verdict, Verdict::unspecified);
+}
+
+TEST(Trust, RefusesToBeWithoutAPolicy) {
+    EXPECT_EQ(brokenLeaf().trust(ticketPolicy())->setPolicy(nullptr), kParameterError);
+}
+
+TEST(Trust, VerifiesSignaturesWithItsLeafsKey) {
+    const Scene scene{TicketChain()};
+    const auto trust = scene.trust(ticketPolicy());
+    Verdict verdict{};
+    trust->evaluate(verdict);
+    ASSERT_NE(trust->copyPublicKey(), nullptr);
+    const auto message = foundation::asBytes("message");
+    Data field = scene.chain.leaf.key.sign(message);
+    field.resize(72);
+    EXPECT_EQ(scene.service()->verifySignature(*trust->copyPublicKey(), message, field), std::nullopt);
+    const auto error =
+        scene.service()->verifySignature(*trust->copyPublicKey(), foundation::asBytes("other"), field);
+    ASSERT_TRUE(error);
+    EXPECT_EQ(error->domain(), foundation::kOSStatusErrorDomain);
+    EXPECT_EQ(error->code(), kSignatureError);
+}
+
+TEST(TrustCreation, RefusesListsThatAreEmptyTooLongOrForeign) {
+    const auto service = Scene(TicketChain()).service();
+    const auto policy = std::make_shared<const Policy>(ticketPolicy());
+    const CertificateRef one = service->createCertificate(TicketChain().issue().leaf.der);
+    std::shared_ptr<Trust> trust;
+    EXPECT_EQ(service->createTrust({}, policy, trust), kParameterError);
+    EXPECT_EQ(service->createTrust({nullptr}, policy, trust), kParameterError);
+    EXPECT_EQ(service->createTrust({one}, nullptr, trust), kParameterError);
+    EXPECT_EQ(service->createTrust({std::make_shared<test::FakeCertificate>(one->der())}, policy, trust),
+              kParameterError);
+    EXPECT_EQ(service->createTrust(std::vector(kMaximumCertificates + 1, one), policy, trust),
+              kParameterError);
+    EXPECT_EQ(trust, nullptr);
+    EXPECT_EQ(service->createTrust(std::vector(kMaximumCertificates, one), policy, trust), kSuccess);
+}
+
+struct BadOption {
+    const char* title;
+    std::string_view key;
+    foundation::Value value;
+};
+
+class UnjudgeablePolicy : public testing::TestWithParam<BadOption> {};
+
+TEST_P(UnjudgeablePolicy, TrustsNothing) {
+    Policy policy = ticketPolicy();
+    policy.options.insert_or_assign(std::string(GetParam().key), GetParam().value);
+    const auto trust = Scene(TicketChain()).trust(policy);
+    Verdict verdict{};
+    EXPECT_EQ(trust->evaluate(verdict), kSuccess);
+    EXPECT_EQ(verdict, Verdict::otherError);
+    EXPECT_NE(trust->copyFailureDescription().value_or("").find(GetParam().key), std::string::npos);
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Option, UnjudgeablePolicy,
+    testing::Values(BadOption{"Unknown", "Unknown", true}, BadOption{"SwitchAsNumber", option::kIdLinkage, 1},
+                    BadOption{"SwitchAsText", option::kBasicConstraints, "true"},
+                    BadOption{"SwitchAsNil", option::kCriticalExtensions, nullptr},
+                    BadOption{"AnchorAsSwitch", option::kPlatformAnchor, true},
+                    BadOption{"AnchorWithSubOption", option::kPlatformAnchor,
+                              Dictionary{{"AnyAnchor", true}}},
+                    BadOption{"ChainLengthAsSwitch", option::kChainLength, true},
+                    BadOption{"ChainLengthAsText", option::kChainLength, "3"},
+                    BadOption{"MarkerAsNumber", option::kLeafMarkerOid, 1},
+                    BadOption{"NoMarkers", option::kLeafMarkerOid, Array{}},
+                    BadOption{"NumberAmongMarkers", option::kIntermediateMarkerOid, Array{"1.2.3", 4}},
+                    BadOption{"KeySizeAsNumber", option::kKeySize, 2048},
+                    BadOption{"KeySizeOfTexts", option::kKeySize, Dictionary{{"RSA", "2048"}}},
+                    BadOption{"EmptyHost", option::kHostName, ""}),
+    [](const auto& row) { return row.param.title; });
+
+TEST(PolicyOption, ThatIsNotInTheListIsNotChecked) {
+    TicketChain chain;
+    chain.leaf.subject.clear();
+    chain.leaf.extensions = {{"1.2.3.4", true}};
+    chain.intermediate.basicConstraints.reset();
+    chain.leaf.key = test::SigningKey::cached(test::KeyKind::p224, "leaf");
+    chain.leaf.authorityKeyIdentifier = test::KeyIdentifier::given("another");
+    EXPECT_EQ(Scene(chain).verdict({"1.2.3", std::nullopt, {}}), Verdict::unspecified);
+}
+
+TEST(PolicyOption, ThatIsFalseIsNotChecked) {
+    TicketChain chain;
+    chain.leaf.subject.clear();
+    Policy policy = ticketPolicy();
+    policy.options.insert_or_assign(std::string(option::kNonEmptySubject), false);
+    EXPECT_EQ(Scene(chain).verdict(policy), Verdict::unspecified);
+}
+
+TEST(PolicyOption, WithoutAnyAnchorOptionMeansThePlatformsOwn) {
+    Scene scene{TicketChain()};
+    scene.roots.clear();
+    EXPECT_EQ(scene.verdict({"1.2.3", std::nullopt, {}}), Verdict::recoverableFailure);
+}
+
+TEST(PolicyOption, OfSeveralMarkersAsksForAll) {
+    Policy policy = ticketPolicy();
+    policy.options.insert_or_assign(std::string(option::kLeafMarkerOid),
+                                    Array{test::kTicketLeafMarker, "1.2.3"});
+    EXPECT_EQ(Scene(TicketChain()).verdict(policy), Verdict::recoverableFailure);
+    TicketChain both;
+    both.leaf.markers.emplace_back("1.2.3");
+    EXPECT_EQ(Scene(both).verdict(policy), Verdict::unspecified);
+}
+
+TEST(ServerPolicy, IsNotMadeForAnEmptyHost) {
+    EXPECT_EQ(createPinnedServerPolicy(""), nullptr);
+    EXPECT_EQ(createCompatibilityServerPolicy(""), nullptr);
+}
+
+TEST(ServerPolicy, AcceptsAnAddressThatTheCertificateNames) {
+    EXPECT_EQ(Scene(test::ServerChain("127.0.0.1")).verdict(*createPinnedServerPolicy("127.0.0.1")),
+              Verdict::unspecified);
+    EXPECT_EQ(Scene(test::ServerChain("::1")).verdict(*createPinnedServerPolicy("::1")),
+              Verdict::unspecified);
+}
+
+TEST(TrustService, ReadsItsAnchorsOnceAndOnlyWhenNeeded) {
+    const test::IssuedChain chain = TicketChain().issue();
+    std::atomic<int> loads = 0;
+    const auto service = makeTrustService(
+        [&] {
+            ++loads;
+            return Anchors{{X509Certificate::parse(chain.root.der)}, {}, {}, {}};
+        },
+        [] { return kNow; });
+    std::vector<CertificateRef> list;
+    for (const Data& der : chain.list()) list.push_back(service->createCertificate(der));
+    const auto policy = std::make_shared<const Policy>(ticketPolicy());
+    EXPECT_EQ(loads, 0);
+    std::vector<std::thread> threads;
+    std::atomic<int> trusted = 0;
+    for (int i = 0; i < 4; ++i) {
+        threads.emplace_back([&] {
+            std::shared_ptr<Trust> trust;
+            Verdict verdict{};
+            if (service->createTrust(list, policy, trust) == kSuccess) trust->evaluate(verdict);
+            if (verdict == Verdict::unspecified) ++trusted;
+        });
+    }
+    for (std::thread& thread : threads) thread.join();
+    EXPECT_EQ(loads, 1);
+    EXPECT_EQ(trusted, 4);
+}
+
+}  // namespace
+}  // namespace pinwell::trust
