@@ -104,8 +104,9 @@ Error refusal(std::string text) {
 Result<Requirements> readRequirements(const Dictionary& options) {
     Requirements requirements;
     for (const auto& [key, value] : options) {
-        const auto* const reader = std::find_if(kReaders.begin(), kReaders.end(),
-                                                [&](const OptionReader& entry) { return entry.key == key; });
+        const auto* const reader =
+            std::find_if(kReaders.begin(), kReaders.end(),
+                         [&wanted = key](const OptionReader& entry) { return entry.key == wanted; });
         if (reader == kReaders.end())
             return refusal(foundation::format("the policy option %@ is not known", key));
         if (!reader->read(value, requirements)) {
