@@ -1,0 +1,29 @@
+// Where the body of a response goes.
+#pragma once
+
+#include "https/session.h"
+
+namespace pinwell::https {
+
+class BodySink {
+  public:
+    virtual ~BodySink() = default;
+
+    /// The next piece. An error ends the transfer.
+    virtual std::optional<Error> write(foundation::ByteView bytes) = 0;
+};
+
+/// Keeps it in memory.
+class MemorySink : public BodySink {
+  public:
+    std::optional<Error> write(foundation::ByteView bytes) override {
+        foundation::append(data_, bytes);
+        return std::nullopt;
+    }
+    Data take() { return std::move(data_); }
+
+  private:
+    Data data_;
+};
+
+}  // namespace pinwell::https

@@ -1,0 +1,92 @@
+#include "https/server_trust.h"
+
+#include <openssl/ssl.h>
+#include <openssl/x509.h>
+#include <openssl/x509_vfy.h>
+
+#include <exception>
+#include <memory>
+#include <optional>
+
+namespace pinwell::https {
+namespace {
+
+using foundation::Data;
+
+struct OpenSSLFree {
+    void operator()(unsigned char* bytes) const noexcept { OPENSSL_free(bytes); }
+};
+
+std::optional<Data> derOf(const X509* certificate) {
+    unsigned char* bytes = nullptr;
+    const int length = i2d_X509(certificate, &bytes);
+    if (length <= 0) return std::nullopt;
+    const std::unique_ptr<unsigned char, OpenSSLFree> owner(bytes);
+    const auto view = std::as_bytes(std::span(bytes, static_cast<std::size_t>(length)));
+    return Data(view.begin(), view.end());
+}
+
+// What the server sent, the leaf first. Nothing when there is none, too many, or one that cannot be written
+// out.
+std::optional<std::vector<Data>> peerCertificates(const X509_STORE_CTX* context) {
+    const X509* const leaf = X509_STORE_CTX_get0_cert(context);
+    STACK_OF(X509)* const sent = X509_STORE_CTX_get0_untrusted(context);
+    const int count = sent != nullptr ? sk_X509_num(sent) : 0;
+    if (leaf == nullptr || static_cast<std::size_t>(count) > kMaximumPeerCertificates) return std::nullopt;
+
+    std::vector<Data> list;
+    const auto add = [&list](const X509* certificate) {
+        auto der = derOf(certificate);
+        if (der) list.push_back(std::move(*der));
+        return der.has_value();
+    };
+    if (!add(leaf)) return std::nullopt;
+    for (int i = 0; i < count; ++i) {
+        const X509* const certificate = sk_X509_value(sent, i);
+        if (certificate != leaf && !add(certificate)) return std::nullopt;
+    }
+    return list;
+}
+
+int verifyThunk(X509_STORE_CTX* context, void* self) {
+    return static_cast<ServerTrust*>(self)->verify(context) ? 1 : 0;
+}
+
+// Alerts are two bytes, level and description (RFC 8446, section 6).
+void messageThunk(int isWritten, int, int contentType, const void* bytes, std::size_t length, SSL*,
+                  void* self) {
+    if (isWritten != 0 || contentType != SSL3_RT_ALERT || length != 2) return;
+    if (static_cast<const unsigned char*>(bytes)[1] == SSL_AD_CLOSE_NOTIFY)
+        static_cast<ServerTrust*>(self)->noteOrderlyEnd();
+}
+
+}  // namespace
+
+bool ServerTrust::install(void* context) noexcept {
+    auto* const tls = static_cast<SSL_CTX*>(context);
+    SSL_CTX_set_cert_verify_callback(tls, verifyThunk, this);
+    SSL_CTX_set_verify(tls, SSL_VERIFY_PEER, nullptr);  // without it a refusal would be noted and passed over
+    SSL_CTX_set_session_cache_mode(tls, SSL_SESS_CACHE_OFF);
+    SSL_CTX_set_options(tls, SSL_OP_NO_TICKET | SSL_OP_NO_RENEGOTIATION);
+    SSL_CTX_set_msg_callback(tls, messageThunk);
+    SSL_CTX_set_msg_callback_arg(tls, this);
+    SSL_CTX_set_keylog_callback(tls,
+                                nullptr);  // the environment could have asked for the keys to be written out
+    return SSL_CTX_set_min_proto_version(tls, TLS1_2_VERSION) == 1;
+}
+
+bool ServerTrust::verify(void* storeContext) noexcept {
+    auto* const context = static_cast<X509_STORE_CTX*>(storeContext);
+    bool trusted = false;
+    try {
+        if (const auto certificates = peerCertificates(context)) trusted = judge_(*certificates);
+    } catch (const std::exception&) {
+        trusted = false;  // the caller is C
+    }
+    asked_ = true;
+    refused_ = refused_ || !trusted;
+    X509_STORE_CTX_set_error(context, trusted ? X509_V_OK : X509_V_ERR_APPLICATION_VERIFICATION);
+    return trusted;
+}
+
+}  // namespace pinwell::https

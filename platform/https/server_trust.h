@@ -1,0 +1,50 @@
+// Where the TLS library's own judgement of a server is replaced by ours.
+//
+// Installed in the TLS context of one connection, it is called in the handshake with the certificates that
+// the server sent. Nothing else decides: no anchors are loaded, and a connection on which the judge was not
+// asked counts as not accepted. Sessions are not resumed and not renegotiated, since neither would ask the
+// judge.
+#pragma once
+
+#include <functional>
+#include <vector>
+
+#include "foundation/bytes.h"
+
+namespace pinwell::https {
+
+/// A longer list is refused unseen. Real chains have 2 to 4.
+inline constexpr std::size_t kMaximumPeerCertificates = 16;
+
+class ServerTrust {
+  public:
+    /// Whether to go on with a server that sent these certificates (DER, the leaf first). Called on the
+    /// thread that carries out the handshake.
+    using Judge = std::function<bool(const std::vector<foundation::Data>& certificates)>;
+
+    explicit ServerTrust(Judge judge) : judge_(std::move(judge)) {}
+    ServerTrust(const ServerTrust&) = delete;
+    ServerTrust& operator=(const ServerTrust&) = delete;
+
+    /// Into a fresh context (an SSL_CTX), which must not be used longer than this object lives. False when
+    /// the context could not be made as strict as it has to be.
+    bool install(void* context) noexcept;
+
+    /// The judge was asked, and accepted each time.
+    bool accepted() const noexcept { return asked_ && !refused_; }
+
+    /// The server has said that it sends no more (close_notify). A connection that ends without was cut.
+    bool sawOrderlyEnd() const noexcept { return sawOrderlyEnd_; }
+    void noteOrderlyEnd() noexcept { sawOrderlyEnd_ = true; }
+
+    /// What the TLS library calls; the context is an X509_STORE_CTX.
+    bool verify(void* storeContext) noexcept;
+
+  private:
+    Judge judge_;
+    bool asked_ = false;
+    bool refused_ = false;
+    bool sawOrderlyEnd_ = false;
+};
+
+}  // namespace pinwell::https

@@ -1,0 +1,249 @@
+#include "https/session.h"
+
+#include <pthread.h>
+
+#include <condition_variable>
+#include <csignal>
+#include <deque>
+#include <mutex>
+#include <thread>
+
+#include "foundation/process.h"
+#include "https/challenge.h"
+#include "https/download_file.h"
+#include "https/redirect.h"
+#include "https/session_options.h"
+#include "https/transfer.h"
+#include "https/transfer_error.h"
+
+namespace pinwell::https {
+namespace {
+
+using foundation::Result;
+
+class SessionTask;
+
+// The tasks that were started and wait for their turn. Shared with the tasks, which may outlive their
+// session.
+class Inbox {
+  public:
+    /// False when the session has gone.
+    bool add(std::shared_ptr<SessionTask> task) {
+        const std::lock_guard lock(mutex_);
+        if (closed_) return false;
+        tasks_.push_back(std::move(task));
+        changed_.notify_one();
+        return true;
+    }
+
+    /// Waits for a task; null once it is closed and empty.
+    std::shared_ptr<SessionTask> take() {
+        std::unique_lock lock(mutex_);
+        changed_.wait(lock, [this] { return closed_ || !tasks_.empty(); });
+        if (tasks_.empty()) return nullptr;
+        auto task = std::move(tasks_.front());
+        tasks_.pop_front();
+        return task;
+    }
+
+    void close() {
+        const std::lock_guard lock(mutex_);
+        closed_ = true;
+        changed_.notify_one();
+    }
+
+  private:
+    std::mutex mutex_;
+    std::condition_variable changed_;
+    std::deque<std::shared_ptr<SessionTask>> tasks_;
+    bool closed_ = false;
+};
+
+class SessionTask : public Task, public std::enable_shared_from_this<SessionTask> {
+  public:
+    /// Without a completion it is a download.
+    SessionTask(std::shared_ptr<Inbox> inbox, Request request, std::optional<DataCompletion> completion)
+        : inbox_(std::move(inbox)), request_(std::move(request)), completion_(std::move(completion)) {}
+
+    void resume() override {
+        {
+            const std::lock_guard lock(mutex_);
+            if (state_ != TaskState::suspended || !request_.url) return;
+            state_ = TaskState::running;
+        }
+        if (!inbox_->add(shared_from_this())) setState(TaskState::suspended);
+    }
+
+    TaskState state() const override {
+        const std::lock_guard lock(mutex_);
+        return state_;
+    }
+
+    std::optional<HTTPResponse> response() const override {
+        const std::lock_guard lock(mutex_);
+        return response_;
+    }
+
+    void setState(TaskState state) {
+        const std::lock_guard lock(mutex_);
+        state_ = state;
+    }
+
+    void setResponse(const HTTPResponse& response) {
+        const std::lock_guard lock(mutex_);
+        response_ = response;
+    }
+
+    // For the worker alone.
+    const Request& request() const { return request_; }
+    bool isDownload() const { return !completion_; }
+    DataCompletion takeCompletion() { return std::move(*completion_); }
+
+  private:
+    const std::shared_ptr<Inbox> inbox_;
+    const Request request_;
+    std::optional<DataCompletion> completion_;
+
+    mutable std::mutex mutex_;
+    TaskState state_ = TaskState::suspended;
+    std::optional<HTTPResponse> response_;
+};
+
+// One worker thread carries out the tasks, one after another. It waits while a callback runs, and holds no
+// object of the transfer or TLS libraries then unless the callback is a challenge: the process may be ended
+// by exit() in any callback, and what those libraries take down at exit must not be in use.
+class NetworkSession : public Session {
+  public:
+    NetworkSession(SessionDelegate& delegate, trust::TrustService& trust, const SessionOptions& options)
+        : delegate_(delegate), trust_(trust), options_(options), worker_([this] { work(); }) {}
+
+    /// Running tasks end with `cancelled`; their callbacks have returned when this does.
+    ~NetworkSession() override {
+        interrupt_.raise();
+        inbox_->close();
+        worker_.join();
+    }
+
+    std::shared_ptr<Task> dataTask(Request request, DataCompletion completion) override {
+        return std::make_shared<SessionTask>(inbox_, std::move(request), std::move(completion));
+    }
+    std::shared_ptr<Task> downloadTask(Request request) override {
+        return std::make_shared<SessionTask>(inbox_, std::move(request), std::nullopt);
+    }
+
+  private:
+    void work() {
+        // A connection that the peer has closed must show as a failed write, not end the process.
+        sigset_t signals;
+        sigemptyset(&signals);
+        sigaddset(&signals, SIGPIPE);
+        pthread_sigmask(SIG_BLOCK, &signals, nullptr);
+        pthread_setname_np(pthread_self(), "https-worker");
+        while (const auto task = inbox_->take()) {
+            if (task->isDownload())
+                carryOutDownload(*task);
+            else
+                carryOutData(*task);
+            task->setState(TaskState::completed);
+        }
+    }
+
+    void carryOutData(SessionTask& task) {
+        std::optional<Data> body;
+        std::optional<HTTPResponse> response;
+        std::optional<Error> error;
+        {
+            MemorySink sink;
+            Result<HTTPResponse> answer = fetch(task.request(), options_.maximumResponseBody, sink);
+            if (answer) {
+                body = sink.take();
+                response = std::move(*answer);
+                task.setResponse(*response);
+            } else {
+                error = answer.error();
+            }
+        }
+        callbacks_.sync([&] {
+            // Its captures are the caller's objects: they go where the caller expects to be called.
+            const DataCompletion completion = task.takeCompletion();
+            if (completion) completion(body, response, error);
+        });
+    }
+
+    void carryOutDownload(SessionTask& task) {
+        std::optional<Error> error = download(task);
+        callbacks_.sync([&] { delegate_.didComplete(*this, task, error); });
+    }
+
+    // The file is gone when this returns.
+    std::optional<Error> download(SessionTask& task) {
+        Result<std::unique_ptr<DownloadFile>> file = DownloadFile::create(temporaryDirectory());
+        if (!file) return file.error();
+        const Result<HTTPResponse> answer = fetch(task.request(), options_.maximumDownload, **file);
+        if (!answer) return answer.error();
+        if (auto error = (*file)->finish()) return error;
+        task.setResponse(*answer);
+        callbacks_.sync([&] { delegate_.didFinishDownloading(*this, task, (*file)->location()); });
+        return std::nullopt;
+    }
+
+    URL temporaryDirectory() const {
+        return options_.temporaryDirectory ? options_.temporaryDirectory() : foundation::temporaryDirectory();
+    }
+
+    // Follows redirects to the answer that is to be had in the end.
+    Result<HTTPResponse> fetch(Request request, std::size_t maximumBody, BodySink& sink) {
+        const TransferContext context{
+            options_, interrupt_, maximumBody,
+            [this](const std::string& host, const std::vector<Data>& certificates) {
+                return challengeDelegate({*this, delegate_, callbacks_, trust_}, host, certificates);
+            }};
+        for (int redirects = 0;; ++redirects) {
+            Result<TransferAnswer> answer = transfer(request, context, sink);
+            if (!answer) return answer.error();
+            if (!answer->redirectTarget) return std::move(answer->response);
+            if (redirects == options_.maximumRedirects)
+                return makeError(URLErrorCode::tooManyRedirects,
+                                 "\"" + request.url->host() + "\" redirects once more after " +
+                                     std::to_string(redirects) + " redirects.");
+            Result<Request> next =
+                requestAfterRedirect(request, answer->response.status, *answer->redirectTarget);
+            if (!next) return next.error();
+            request = std::move(*next);
+        }
+    }
+
+    SessionDelegate& delegate_;
+    trust::TrustService& trust_;
+    const SessionOptions options_;
+    const std::shared_ptr<Inbox> inbox_ = std::make_shared<Inbox>();
+    Interrupt interrupt_;
+    foundation::SerialQueue callbacks_{"https-callbacks"};
+    std::thread worker_;  // last: it uses all of the above
+};
+
+class NetworkSessionService : public SessionService {
+  public:
+    NetworkSessionService(trust::TrustService& trust, SessionOptions options)
+        : trust_(trust), options_(std::move(options)) {}
+
+    std::shared_ptr<Session> ephemeralSession(SessionDelegate& delegate) override {
+        return std::make_shared<NetworkSession>(delegate, trust_, options_);
+    }
+
+  private:
+    trust::TrustService& trust_;
+    SessionOptions options_;
+};
+
+}  // namespace
+
+std::unique_ptr<SessionService> makeSessionService(trust::TrustService& trust, SessionOptions options) {
+    return std::make_unique<NetworkSessionService>(trust, std::move(options));
+}
+
+std::unique_ptr<SessionService> makeSessionService(trust::TrustService& trust) {
+    return makeSessionService(trust, SessionOptions{});
+}
+
+}  // namespace pinwell::https

@@ -1,0 +1,34 @@
+// What a session holds itself to. The defaults are the product's; tests choose others.
+#pragma once
+
+#include <chrono>
+#include <functional>
+#include <memory>
+
+#include "https/session.h"
+
+namespace pinwell::https {
+
+using Clock = std::chrono::steady_clock;
+
+struct SessionOptions {
+    std::size_t maximumResponseBody = kMaximumResponseBody;
+    std::size_t maximumDownload = kMaximumDownload;
+    std::size_t maximumHeaderBytes =
+        128UL * 1024;                       // of one exchange: interim responses and trailers included
+    std::size_t maximumHeaderFields = 256;  // the same
+    int maximumRedirects = kMaximumRedirects;
+
+    /// How long nothing may arrive, or be sent. Name lookup, connection and handshake up to the server's
+    /// certificate count as one wait.
+    std::chrono::milliseconds idleLimit = std::chrono::seconds(kIdleTimeoutSeconds);
+    std::chrono::milliseconds pollInterval = std::chrono::seconds(1);  // how often the clock is looked at
+    std::function<Clock::time_point()> now = Clock::now;
+
+    /// Where downloads are kept; when empty, the user's temporary directory.
+    std::function<URL()> temporaryDirectory = {};
+};
+
+std::unique_ptr<SessionService> makeSessionService(trust::TrustService& trust, SessionOptions options);
+
+}  // namespace pinwell::https

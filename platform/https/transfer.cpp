@@ -1,0 +1,415 @@
+#include "https/transfer.h"
+
+#include <curl/curl.h>
+
+#include <algorithm>
+#include <array>
+#include <cstring>
+#include <memory>
+#include <system_error>
+
+#include "https/redirect.h"
+#include "https/response_head.h"
+#include "https/server_trust.h"
+#include "https/transfer_error.h"
+
+namespace pinwell::https {
+namespace {
+
+using foundation::Result;
+
+template <auto Free>
+struct Deleter {
+    template <class T>
+    void operator()(T* object) const noexcept {
+        Free(object);
+    }
+};
+using EasyHandle = std::unique_ptr<CURL, Deleter<curl_easy_cleanup>>;
+using MultiHandle = std::unique_ptr<CURLM, Deleter<curl_multi_cleanup>>;
+using AddressHandle = std::unique_ptr<CURLU, Deleter<curl_url_cleanup>>;
+using HeaderListHandle = std::unique_ptr<curl_slist, Deleter<curl_slist_free_all>>;
+
+// Not before the first transfer: it costs start-up time, and most runs that fail never get here.
+bool libraryIsReady() {
+    static const bool ready = curl_global_init(CURL_GLOBAL_DEFAULT) == CURLE_OK;
+    return ready;
+}
+
+// A URL as the transfer library understands it.
+struct Target {
+    AddressHandle address;
+    std::string host;  // without brackets
+    std::string port;
+
+    std::string text() const { return host + " port " + port; }
+};
+
+std::string partOf(CURLU* address, CURLUPart part, unsigned flags) {
+    char* text = nullptr;
+    if (curl_url_get(address, part, &text, flags) != CURLUE_OK) return {};
+    const std::unique_ptr<char, Deleter<curl_free>> owner(text);
+    return text;
+}
+
+Result<Target> targetOf(const URL& url) {
+    const std::string text = url.absoluteString();
+    const auto refuse = [&text](std::string_view why) {
+        return makeError(URLErrorCode::unsupportedURL, "The URL \"" + text + "\" " + std::string(why) + ".");
+    };
+    if (url.scheme() != "https") return refuse("is not an https URL");
+    Target target{AddressHandle(curl_url()), {}, {}};
+    const CURLUcode code =
+        curl_url_set(target.address.get(), CURLUPART_URL, text.c_str(), CURLU_DISALLOW_USER);
+    if (code == CURLUE_USER_NOT_ALLOWED)  // its text would show the password
+        return makeError(URLErrorCode::unsupportedURL,
+                         "The URL for \"" + url.host() + "\" holds a user name, which is not supported.");
+    if (code != CURLUE_OK) return refuse("is malformed");
+    target.host = partOf(target.address.get(), CURLUPART_HOST, 0);
+    target.port = partOf(target.address.get(), CURLUPART_PORT, CURLU_DEFAULT_PORT);
+    if (target.host.starts_with('[') && target.host.ends_with(']'))
+        target.host = target.host.substr(1, target.host.size() - 2);
+    // The name that is judged must be the one that is connected to, however oddly it is written.
+    const CaseInsensitiveLess less;
+    if (less(target.host, url.host()) || less(url.host(), target.host))
+        return refuse("has an ambiguous host");
+    target.host = url.host();
+    return target;
+}
+
+// RFC 9110, section 5.6.2
+bool isToken(std::string_view text) {
+    const auto tokenCharacter = [](char c) {
+        return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') ||
+               std::string_view("!#$%&'*+-.^_`|~").find(c) != std::string_view::npos;
+    };
+    return !text.empty() && std::all_of(text.begin(), text.end(), tokenCharacter);
+}
+
+bool isFieldValue(std::string_view text) {
+    return std::none_of(text.begin(), text.end(), [](char c) {
+        const auto byte = static_cast<unsigned char>(c);
+        return (byte < 0x20 && c != '\t') || byte == 0x7F;
+    });
+}
+
+bool isWellFormed(const Request& request) {
+    return isToken(request.method) &&
+           std::all_of(request.headers.begin(), request.headers.end(),
+                       [](auto& field) { return isToken(field.first) && isFieldValue(field.second); });
+}
+
+HeaderListHandle headerList(const Request& request) {
+    HeaderListHandle list;
+    const auto add = [&list](const std::string& line) {
+        curl_slist* const longer = curl_slist_append(list.get(), line.c_str());
+        if (longer == nullptr) throw std::bad_alloc();
+        static_cast<void>(list.release());
+        list.reset(longer);
+    };
+    for (const auto& [name, value] : request.headers) add(value.empty() ? name + ";" : name + ": " + value);
+    // What the library would add of its own accord.
+    for (const char* name : {"Content-Type", "Expect"})
+        if (!request.headers.contains(std::string_view(name))) add(std::string(name) + ":");
+    return list;
+}
+
+class Exchange {
+  public:
+    Exchange(const Request& request, const TransferContext& context, BodySink& sink, Target target)
+        : request_(request),
+          context_(context),
+          sink_(sink),
+          target_(std::move(target)),
+          head_(context.options.maximumHeaderBytes, context.options.maximumHeaderFields),
+          serverTrust_([this](const std::vector<Data>& certificates) { return judge(certificates); }) {}
+
+    Result<TransferAnswer> run() {
+        headers_ = headerList(request_);
+        if (!libraryIsReady() || !easy_ || !multi_ || !configure()) {
+            const auto result = setupResult_ == CURLE_OK ? CURLE_FAILED_INIT : setupResult_;
+            return makeError(
+                URLErrorCode::invalidConfiguration,
+                std::string("The transfer could not be set up: ") + curl_easy_strerror(result) + ".");
+        }
+        lastActivity_ = context_.options.now();
+        if (curl_multi_add_handle(multi_.get(), easy_.get()) != CURLM_OK)
+            return makeError(URLErrorCode::unknown, "The transfer could not be started.");
+        const CURLcode result = drive();
+        Result<TransferAnswer> outcome = answer(result);
+        curl_multi_remove_handle(multi_.get(), easy_.get());
+        return outcome;
+    }
+
+  private:
+    template <class T>
+    void set(CURLoption option, T value) {
+        if (setupResult_ == CURLE_OK) setupResult_ = curl_easy_setopt(easy_.get(), option, value);
+    }
+
+    bool configure() {
+        configureConnection();
+        configureTrust();
+        configureRequest();
+        configureCallbacks();
+        return setupResult_ == CURLE_OK;
+    }
+
+    void configureConnection() {
+        set(CURLOPT_CURLU, target_.address.get());
+        set(CURLOPT_PROTOCOLS_STR, "https");
+        set(CURLOPT_FOLLOWLOCATION, 0L);
+        set(CURLOPT_HTTP_VERSION, long{CURL_HTTP_VERSION_2TLS});
+        set(CURLOPT_HTTP09_ALLOWED, 0L);
+        set(CURLOPT_NETRC, long{CURL_NETRC_IGNORED});
+        set(CURLOPT_HTTPAUTH, 0L);
+        set(CURLOPT_SUPPRESS_CONNECT_HEADERS, 1L);
+        set(CURLOPT_NOSIGNAL, 1L);
+        set(CURLOPT_QUICK_EXIT, 1L);  // a name server that is silent must not hold up the end of a task
+        set(CURLOPT_MAXFILESIZE_LARGE, static_cast<curl_off_t>(context_.maximumBody));
+        set(CURLOPT_ERRORBUFFER, errorText_.data());
+    }
+
+    // The library's own checks stay switched on without any anchors: should our callback not be asked, the
+    // connection is refused. The host name is part of the policy that our callback's judge applies.
+    void configureTrust() {
+        set(CURLOPT_SSLVERSION, long{CURL_SSLVERSION_TLSv1_2});
+        set(CURLOPT_SSL_VERIFYPEER, 1L);
+        set(CURLOPT_SSL_VERIFYHOST, 0L);
+        set(CURLOPT_SSL_SESSIONID_CACHE, 0L);
+        for (const CURLoption option :
+             {CURLOPT_CAINFO, CURLOPT_CAPATH, CURLOPT_PROXY_CAINFO, CURLOPT_PROXY_CAPATH})
+            set(option, static_cast<const char*>(nullptr));
+        set(CURLOPT_SSL_CTX_FUNCTION, &Exchange::onTLSContext);
+        set(CURLOPT_SSL_CTX_DATA, this);
+        set(CURLOPT_PREREQFUNCTION, &Exchange::onConnected);
+        set(CURLOPT_PREREQDATA, this);
+        // A proxy's certificate would be judged under the wrong host. The library alone knows whether the
+        // environment's proxy applies to this host, so it is left to choose one, and to fail there by itself.
+        set(CURLOPT_PROXY_SSL_CIPHER_LIST, "no-cipher");
+    }
+
+    void configureRequest() {
+        set(CURLOPT_USERAGENT, std::string(kUserAgent).c_str());
+        set(CURLOPT_HTTPHEADER, headers_.get());
+        set(CURLOPT_HEADEROPT, long{CURLHEADER_SEPARATE});  // a proxy gets none of them
+        if (request_.method == "HEAD") {
+            set(CURLOPT_NOBODY, 1L);
+            return;
+        }
+        if (!request_.body.empty() || request_.method == "POST" || request_.method == "PUT") {
+            set(CURLOPT_POST, 1L);
+            set(CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(request_.body.size()));
+            // Never null: that would mean a body that is read elsewhere.
+            set(CURLOPT_POSTFIELDS, request_.body.empty() ? static_cast<const void*>("")
+                                                          : static_cast<const void*>(request_.body.data()));
+        }
+        set(CURLOPT_CUSTOMREQUEST, request_.method.c_str());
+    }
+
+    void configureCallbacks() {
+        set(CURLOPT_HEADERFUNCTION, &Exchange::onHeader);
+        set(CURLOPT_HEADERDATA, this);
+        set(CURLOPT_WRITEFUNCTION, &Exchange::onBody);
+        set(CURLOPT_WRITEDATA, this);
+        set(CURLOPT_XFERINFOFUNCTION, &Exchange::onProgress);
+        set(CURLOPT_XFERINFODATA, this);
+        set(CURLOPT_NOPROGRESS, 0L);
+    }
+
+    CURLcode drive() {
+        while (true) {
+            int running = 0;
+            if (curl_multi_perform(multi_.get(), &running) != CURLM_OK) return CURLE_FAILED_INIT;
+            if (running == 0) break;
+            if (!mayGoOn()) return CURLE_ABORTED_BY_CALLBACK;
+            curl_waitfd interrupt{context_.interrupt.descriptor(), CURL_WAIT_POLLIN, 0};
+            const auto wait = static_cast<int>(context_.options.pollInterval.count());
+            if (curl_multi_poll(multi_.get(), &interrupt, 1, wait, nullptr) != CURLM_OK)
+                return CURLE_FAILED_INIT;
+        }
+        int remaining = 0;
+        const CURLMsg* const message = curl_multi_info_read(multi_.get(), &remaining);
+        return message != nullptr && message->msg == CURLMSG_DONE ? message->data.result : CURLE_FAILED_INIT;
+    }
+
+    bool mayGoOn() {
+        if (context_.interrupt.isRaised()) {
+            fail(URLErrorCode::cancelled, "the session was ended");
+            return false;
+        }
+        if (context_.options.now() - lastActivity_ < context_.options.idleLimit) return true;
+        const auto limit =
+            std::chrono::duration_cast<std::chrono::seconds>(context_.options.idleLimit).count();
+        fail(URLErrorCode::timedOut, "no answer for " + std::to_string(limit) + " seconds");
+        return false;
+    }
+
+    Result<TransferAnswer> answer(CURLcode result) {
+        if (result == CURLE_OK && !failure_ && !(serverTrust_.accepted() && head_.isComplete()))
+            fail(URLErrorCode::badServerResponse, "the answer is not HTTP");
+        if (result == CURLE_OK && endsWithConnection() && !serverTrust_.sawOrderlyEnd())
+            fail(URLErrorCode::connectionLost, "the connection was cut within the answer");
+        if (allocationFailed_) fail(URLErrorCode::tooLarge, "the answer is larger than can be kept");
+        if (result != CURLE_OK && !failure_) failFrom(result);
+        if (failure_) return std::move(*failure_).with(foundation::kURLKey, *request_.url);
+
+        TransferAnswer answer{{*request_.url, head_.status(), head_.headers()}, std::nullopt};
+        if (!isRedirect(answer.response)) return answer;
+        // Fields of one name were joined with a space; an address has none.
+        if (answer.response.header("Location")->find(' ') != std::string::npos)
+            return makeError(
+                URLErrorCode::unsupportedURL,
+                target_.text() + ": the redirect names more than one target, or a malformed one.");
+        const char* target = nullptr;
+        curl_easy_getinfo(easy_.get(), CURLINFO_REDIRECT_URL, &target);
+        answer.redirectTarget = target != nullptr ? target : "";
+        return answer;
+    }
+
+    // Whether nothing but the end of the connection tells where the body ends (RFC 9112, section 6.3). The
+    // library takes any end for one, so that whoever can cut a connection could shorten such a body.
+    bool endsWithConnection() const {
+        long version = 0;
+        curl_easy_getinfo(easy_.get(), CURLINFO_HTTP_VERSION, &version);
+        if (version != CURL_HTTP_VERSION_1_0 && version != CURL_HTTP_VERSION_1_1) return false;
+        if (request_.method == "HEAD" || head_.status() == 204 || head_.status() == 304) return false;
+        const auto coding = head_.headers().find("Transfer-Encoding");
+        if (coding == head_.headers().end()) return !head_.headers().contains("Content-Length");
+        const CaseInsensitiveLess less;
+        return less(coding->second, "chunked") || less("chunked", coding->second);
+    }
+
+    // The first failure is the cause; what the library reports after it is a consequence.
+    void fail(URLErrorCode code, const std::string& reason) {
+        if (!failure_) failure_ = makeError(code, target_.text() + ": " + reason + ".");
+    }
+
+    void failFrom(CURLcode result) {
+        const TransferFailure& failure = failureOf(result);
+        long proxyStatus = 0;
+        curl_easy_getinfo(easy_.get(), CURLINFO_HTTP_CONNECTCODE, &proxyStatus);
+        if (proxyStatus != 0 && proxyStatus / 100 != 2) {
+            fail(URLErrorCode::proxyFailed, "the proxy refused with status " + std::to_string(proxyStatus));
+            return;
+        }
+        std::string reason(failure.reason);
+        long number = 0;
+        curl_easy_getinfo(easy_.get(), CURLINFO_OS_ERRNO, &number);
+        if (failure.code == URLErrorCode::cannotConnect && number != 0)
+            reason += " (" + std::generic_category().message(static_cast<int>(number)) + ")";
+        else if (failure.code != URLErrorCode::cannotFindHost && std::strlen(errorText_.data()) > 0)
+            reason += " (" + std::string(errorText_.data()) + ")";
+        fail(failure.code, reason);
+    }
+
+    bool judge(const std::vector<Data>& certificates) {
+        std::optional<Error> refusal = context_.judge(target_.host, certificates);
+        lastActivity_ = context_.options.now();  // the time that the judge took is not the server's
+        if (refusal && !failure_) failure_ = std::move(refusal);
+        return !failure_;
+    }
+
+    // The library's callbacks are called from C: nothing may be thrown out of them.
+    template <class Work>
+    bool guarded(Work work) noexcept {
+        try {
+            return work();
+        } catch (const std::exception&) {
+            allocationFailed_ = true;
+            return false;
+        }
+    }
+
+    static CURLcode onTLSContext(CURL*, void* context, void* self) noexcept {
+        auto& exchange = *static_cast<Exchange*>(self);
+        return exchange.serverTrust_.install(context) ? CURLE_OK : CURLE_SSL_CONNECT_ERROR;
+    }
+
+    static int onConnected(void* self, char*, char*, int, int) noexcept {
+        auto& exchange = *static_cast<Exchange*>(self);
+        const bool judged = exchange.guarded([&] {
+            if (!exchange.serverTrust_.accepted())
+                exchange.fail(URLErrorCode::secureConnectionFailed, "the server was not judged");
+            return !exchange.failure_;
+        });
+        return judged ? CURL_PREREQFUNC_OK : CURL_PREREQFUNC_ABORT;
+    }
+
+    static std::size_t onHeader(char* bytes, std::size_t, std::size_t count, void* self) noexcept {
+        auto& exchange = *static_cast<Exchange*>(self);
+        return exchange.guarded([&] { return exchange.takeHeader({bytes, count}); }) ? count : 0;
+    }
+
+    bool takeHeader(std::string_view line) {
+        lastActivity_ = context_.options.now();
+        if (head_.addLine(line)) return true;
+        fail(URLErrorCode::tooLarge, "the answer's header is larger than allowed");
+        return false;
+    }
+
+    static std::size_t onBody(char* bytes, std::size_t, std::size_t count, void* self) noexcept {
+        auto& exchange = *static_cast<Exchange*>(self);
+        return exchange.guarded([&] { return exchange.takeBody({bytes, count}); }) ? count : 0;
+    }
+
+    bool takeBody(std::string_view bytes) {
+        lastActivity_ = context_.options.now();
+        if (bytes.size() > context_.maximumBody - received_) {
+            fail(URLErrorCode::tooLarge,
+                 "the answer is larger than the " + std::to_string(context_.maximumBody) + " bytes allowed");
+            return false;
+        }
+        received_ += bytes.size();
+        if (isRedirect({*request_.url, head_.status(), head_.headers()})) return true;
+        if (auto error = sink_.write(foundation::asBytes(bytes))) {
+            if (!failure_) failure_ = std::move(error);
+            return false;
+        }
+        return true;
+    }
+
+    static int onProgress(void* self, curl_off_t, curl_off_t, curl_off_t, curl_off_t uploaded) noexcept {
+        auto& exchange = *static_cast<Exchange*>(self);
+        if (uploaded == exchange.uploaded_) return 0;
+        exchange.uploaded_ = uploaded;
+        return exchange.guarded([&] {
+            exchange.lastActivity_ = exchange.context_.options.now();
+            return true;
+        })
+                   ? 0
+                   : 1;
+    }
+
+    const Request& request_;
+    const TransferContext& context_;
+    BodySink& sink_;
+    Target target_;
+    ResponseHead head_;
+    ServerTrust serverTrust_;
+    HeaderListHandle headers_;
+    std::array<char, CURL_ERROR_SIZE> errorText_{};
+    std::optional<Error> failure_;
+    bool allocationFailed_ = false;
+    CURLcode setupResult_ = CURLE_OK;
+    Clock::time_point lastActivity_;
+    std::size_t received_ = 0;
+    curl_off_t uploaded_ = 0;
+    MultiHandle multi_{curl_multi_init()};
+    EasyHandle easy_{curl_easy_init()};  // last: it uses all of the above until it is gone
+};
+
+}  // namespace
+
+Result<TransferAnswer> transfer(const Request& request, const TransferContext& context, BodySink& sink) {
+    if (!isWellFormed(request))
+        return makeError(URLErrorCode::invalidConfiguration,
+                         "The request's method or a header is malformed.");
+    if (!libraryIsReady())
+        return makeError(URLErrorCode::invalidConfiguration, "The transfer library could not be set up.");
+    Result<Target> target = targetOf(*request.url);
+    if (!target) return target.error();
+    return Exchange(request, context, sink, std::move(*target)).run();
+}
+
+}  // namespace pinwell::https

@@ -1,0 +1,39 @@
+// One HTTPS exchange: a request, and the answer of that very URL. Redirects are the caller's to follow.
+//
+// Every exchange has a connection of its own, so that every exchange is judged. Nothing is taken from the
+// environment but the proxy (https_proxy, all_proxy, no_proxy); no cookies, no credentials, no cache.
+#pragma once
+
+#include <functional>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "https/body_sink.h"
+#include "https/interrupt.h"
+#include "https/session_options.h"
+
+namespace pinwell::https {
+
+struct TransferContext {
+    const SessionOptions& options;
+    const Interrupt& interrupt;  // ends the exchange with `cancelled`
+    std::size_t maximumBody;
+
+    /// Judges the server of that host by the certificates it sent, the leaf first: nothing, or why it is
+    /// refused.
+    std::function<std::optional<Error>(const std::string& host, const std::vector<Data>& certificates)> judge;
+};
+
+struct TransferAnswer {
+    HTTPResponse response;
+    std::optional<std::string> redirectTarget;  // of a redirect: its Location, made absolute
+};
+
+/// Blocks until the answer is complete or has failed. The body of a redirect is dropped, any other goes to
+/// `sink`. A URL that is not https, or that names a user, is refused before anything is sent. The calling
+/// thread must have SIGPIPE blocked.
+foundation::Result<TransferAnswer> transfer(const Request& request, const TransferContext& context,
+                                            BodySink& sink);
+
+}  // namespace pinwell::https

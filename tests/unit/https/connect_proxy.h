@@ -1,0 +1,43 @@
+// A proxy on the loopback address that understands CONNECT, for one connection after another.
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+#include <mutex>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "foundation/file_io.h"
+
+namespace pinwell::test {
+
+class ConnectProxy {
+  public:
+    /// Answers every CONNECT with this status, and with 200 connects to that port of the loopback address
+    /// whatever host was asked for.
+    explicit ConnectProxy(std::uint16_t targetPort, int status = 200);
+    ~ConnectProxy();
+    ConnectProxy(const ConnectProxy&) = delete;
+    ConnectProxy& operator=(const ConnectProxy&) = delete;
+
+    std::string url(const std::string& scheme = "http", const std::string& user = {}) const;
+
+    /// The heads of the requests so far.
+    std::vector<std::string> heads() const;
+
+  private:
+    void run();
+    void serve(int client);
+
+    std::uint16_t targetPort_;
+    int status_;
+    std::uint16_t port_ = 0;
+    foundation::FileDescriptor listener_;
+    foundation::FileDescriptor stop_;
+    mutable std::mutex mutex_;
+    std::vector<std::string> heads_;
+    std::thread thread_;  // last: it uses all of the above
+};
+
+}  // namespace pinwell::test

@@ -1,0 +1,113 @@
+// A session, its recording delegate and a server for it to talk to.
+#pragma once
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <future>
+#include <thread>
+
+#include "https/session_options.h"
+#include "support/certificate_builder.h"
+#include "support/fake_trust_service.h"
+#include "support/hostile_server.h"
+#include "support/temporary_directory.h"
+
+namespace pinwell::test {
+
+/// Time that stands still until the test moves it.
+class ManualClock {
+  public:
+    https::Clock::time_point now() const { return https::Clock::time_point(std::chrono::seconds(seconds_)); }
+    void advance(int seconds) { seconds_ += seconds; }
+
+  private:
+    std::atomic<int> seconds_ = 0;
+};
+
+/// Accepts every server unless told otherwise. Read its records only when the task has ended.
+class RecordingDelegate : public https::SessionDelegate {
+  public:
+    using Challenge = https::AuthenticationChallenge;
+
+    std::function<void(const Challenge&, const https::ChallengeCompletion&)> onChallenge = accept;
+    std::function<void(https::Task&, const foundation::URL&)> onDownload = [](auto&, auto&) {};
+    std::function<void(https::Task&, const std::optional<foundation::Error>&)> onComplete = [](auto&, auto&) {
+    };
+
+    std::vector<std::string> events;  // "challenge HOST", "downloaded", "complete", "completion"
+    std::vector<std::thread::id> threads;
+
+    static void accept(const Challenge& challenge, const https::ChallengeCompletion& completion) {
+        completion(https::Disposition::useCredential, https::Credential{challenge.serverTrust});
+    }
+
+    void record(std::string event) {
+        events.push_back(std::move(event));
+        threads.push_back(std::this_thread::get_id());
+    }
+
+    void didReceiveChallenge(https::Session&, const Challenge& challenge,
+                             const https::ChallengeCompletion& completion) override {
+        record("challenge " + challenge.host);
+        onChallenge(challenge, completion);
+    }
+    void didFinishDownloading(https::Session&, https::Task& task, const foundation::URL& location) override {
+        record("downloaded");
+        onDownload(task, location);
+    }
+    void didComplete(https::Session&, https::Task& task,
+                     const std::optional<foundation::Error>& error) override {
+        record("complete");
+        onComplete(task, error);
+    }
+};
+
+/// What a task came to.
+struct Outcome {
+    std::optional<foundation::Data> body;
+    std::optional<https::HTTPResponse> response;
+    std::optional<foundation::Error> error;
+
+    std::string text() const { return body ? foundation::toString(*body) : "(no body)"; }
+    int status() const { return response ? response->status : 0; }
+};
+
+https::Request get(const std::string& url);
+https::Request post(const std::string& url, std::string_view body);
+
+/// That it failed so, and that the text is one line that holds these words.
+void expectFailure(const Outcome& outcome, https::URLErrorCode code, std::string_view words);
+
+class SessionTest : public ::testing::Test {
+  protected:
+    SessionTest();
+
+    https::Session& session();
+    std::future<Outcome> start(https::Request request);
+    Outcome fetch(https::Request request) { return start(std::move(request)).get(); }
+    Outcome fetch(const std::string& url) { return fetch(get(url)); }
+    Outcome download(https::Request request);
+
+    /// Fetches from a server of one script.
+    Outcome fetchFrom(Script script);
+
+    /// Moves the clock on until the task has given up.
+    Outcome outlast(std::future<Outcome> outcome);
+
+    static ServerIdentity identity();
+
+    ManualClock clock;
+    TemporaryDirectory directory;
+    FakeTrustService trust;
+    RecordingDelegate delegate;
+    https::SessionOptions options;
+    HostileServer server{identity()};
+
+  private:
+    std::unique_ptr<https::SessionService> service_;
+    std::shared_ptr<https::Session> session_;  // last: it uses all of the above
+};
+
+}  // namespace pinwell::test
