@@ -2,7 +2,11 @@
 //
 // A session is ephemeral: nothing of it outlives the process, no cookies, cache or credentials are kept. It owns a
 // serial callback queue; the delegate's methods and the completion handlers run there, one at a time, never on the
-// thread that started the task. A session must not be destroyed from its own queue.
+// thread that started the task. The tasks of a session are carried out one after another. The process may be
+// ended by exit() in any callback.
+//
+// Destroying a session ends its running tasks with `cancelled`; it returns when their callbacks have. A session
+// must not be destroyed from its own queue.
 #pragma once
 
 #include <functional>
@@ -62,7 +66,8 @@ struct Request {
     void addHeader(std::string_view name, std::string_view value);
 };
 
-/// What came back before the body. Of a redirect chain, the last one's.
+/// What came back before the body. Of a redirect chain, the last one's. Fields of one name are joined
+/// with ", ".
 struct HTTPResponse {
     URL url;
     int status = 0;
@@ -123,13 +128,18 @@ class Task {
     virtual ~Task() = default;
 
     /// Starts it. A task whose request has no URL does not start: the state stays what it is not running, the
-    /// completion is not called.
+    /// completion is not called. Neither does one whose session has gone. A second call does nothing.
     virtual void resume() = 0;
+
+    /// `completed` from when the last callback has returned: a failure that comes at once seldom hides
+    /// from who has just started the task that it did start.
     virtual TaskState state() const = 0;
+
+    /// Nothing until the answer is complete, and after an error.
     virtual std::optional<HTTPResponse> response() const = 0;
 };
 
-/// Body, response and error of a data task, each may be missing.
+/// Body and response of a data task, or its error; an empty body is there, and empty.
 using DataCompletion =
     std::function<void(const std::optional<Data>&, const std::optional<HTTPResponse>&, const std::optional<Error>&)>;
 

@@ -113,6 +113,7 @@ TEST_F(SessionTasks, MayStartAnotherFromACallback) {
 TEST_F(SessionTasks, MayStartADownloadOfAnotherSessionFromACallbackAndFindItRunning) {
     const auto service = https::makeSessionService(trust, options);
     RecordingDelegate other;
+    std::promise<void> started;
     std::promise<void> downloaded;
     other.onComplete = [&](auto&, auto& error) {
         EXPECT_FALSE(error);
@@ -126,8 +127,10 @@ TEST_F(SessionTasks, MayStartADownloadOfAnotherSessionFromACallbackAndFindItRunn
         download = second->downloadTask(get(server.url("/ticket")));
         download->resume();
         stateAfterStart = download->state();
+        started.set_value();
     });
     first->resume();
+    started.get_future().wait();
     downloaded.get_future().wait();
     EXPECT_EQ(stateAfterStart, TaskState::running);
 }
