@@ -1,0 +1,88 @@
+// The ticket: the payload of a satchel, which lists the code-directory hashes that it vouches for.
+//
+// Payload. All integers are little-endian.
+//
+//   Offset  Size           Field
+//   0       4              magic, "m8tk"
+//   4       2              version, 1 or 2
+//   6       2              hash length, 20 or 48
+//   8       4              number of entries
+//   12      4              flags: bit 0 means revoked, the others have no meaning
+//   16      8              signature time; carried, never interpreted (tickets of our own making: seconds
+//   since
+//                          1970-01-01 00:00:00 UTC)
+//   24      n x entrySize  entries
+//
+// An entry of version 1 is a hash; one of version 2 is an algorithm byte, then a hash. The payload is exactly
+// as long as its count says, at least 24 bytes and at most 16 MiB.
+//
+// Refused when decoded: any other magic, version, hash length or size. Refused only when it is copied out: a
+// version 2 entry whose algorithm is 0 or unknown, or whose algorithm's hash is longer than the ticket's hash
+// length. The other entries of such a ticket stay usable. An algorithm whose hash is shorter takes the first
+// bytes of the entry's.
+//
+// A ticket is immutable and independent of the bytes it was decoded from; it may be read from any thread. The
+// functions return 0 for success and -1 for any refusal, except where they say otherwise.
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <string_view>
+
+#include "trust/trust.h"
+
+namespace pinwell {
+
+inline constexpr std::string_view kTicketMagic = "m8tk";
+inline constexpr std::size_t kTicketHeaderSize = 24;
+inline constexpr std::size_t kTicketMaximumSize = 16 * 1024 * 1024;
+
+/// Flag: the software must not run.
+inline constexpr std::uint32_t kTicketRevoked = 1;
+
+/// One heap block behind an opaque pointer. Whoever gets one frees it, once, with tm_ticket_free.
+struct tm_ticket;
+
+/// One hash of a ticket.
+struct tm_cdhash {
+    std::uint32_t algorithm = 0;          // 0 in version 1 tickets, which name none
+    std::uint16_t length = 0;             // 20 or 48
+    std::array<std::byte, 64> hash = {};  // zero behind the first `length` bytes
+};
+
+/// From a container to its ticket, or a refusal: satchel_get_validated_payload, then tm_ticket_decode.
+/// `ticket` is written only on success.
+std::int32_t satchel_get_validated_tm_ticket(const std::byte* container, std::uint64_t length,
+                                             tm_ticket** ticket, trust::TrustService& service);
+
+/// Decodes a payload that has been verified. `ticket` is written only on success.
+std::int32_t tm_ticket_decode(const std::byte* payload, std::int64_t size, tm_ticket** ticket);
+
+/// A ticket of the same bytes; null when memory runs out.
+tm_ticket* tm_ticket_copy(const tm_ticket* ticket);
+
+/// Null is harmless.
+void tm_ticket_free(tm_ticket* ticket) noexcept;
+
+// These take a ticket and do not check for null.
+std::uint16_t tm_ticket_get_version(const tm_ticket* ticket);
+std::uint64_t tm_ticket_get_signature_time(const tm_ticket* ticket);
+std::uint32_t tm_ticket_get_flags(const tm_ticket* ticket);
+std::uint32_t tm_ticket_get_cdhash_count(const tm_ticket* ticket);
+
+/// The entry at `index`. `cdhash` is written only on success.
+std::int32_t tm_ticket_copy_cdhash(const tm_ticket* ticket, std::uint64_t index, tm_cdhash* cdhash);
+
+/// Bytes of a code-directory hash by its algorithm, numbered as in code directories (codesign::DigestType):
+/// 20 for 0 to 3, 48 for 4; 0 when unknown.
+std::size_t tm_cdhash_algorithm_get_size(std::uint32_t algorithm);
+
+/// A ticket with an owner.
+struct tm_ticket_deleter {
+    void operator()(tm_ticket* ticket) const noexcept { tm_ticket_free(ticket); }
+};
+using tm_ticket_ptr = std::unique_ptr<tm_ticket, tm_ticket_deleter>;
+
+}  // namespace pinwell
