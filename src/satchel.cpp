@@ -35,6 +35,16 @@ bool wrapsAddressSpace(const std::byte* start, std::uint64_t length) {
     return length > std::numeric_limits<std::uintptr_t>::max() - std::bit_cast<std::uintptr_t>(start);
 }
 
+// An object that cannot be made is a refusal like any other here.
+template <class Step>
+trust::Status guardMemory(Step step) {
+    try {
+        return step();
+    } catch (const std::bad_alloc&) {
+        return status::kNotAvailable;
+    }
+}
+
 // The policy that the platform security library would have made, option by option.
 trust::Status createLocalPolicy(trust::PolicyRef* policy) {
     Dictionary options;
@@ -149,11 +159,7 @@ std::int32_t satchel_get_validated_payload(const std::byte* container, std::uint
 
 trust::Status _satchel_verify(const satchel_view* view, trust::TrustService& service) {
     if (view == nullptr) return status::kBadParameter;
-    try {
-        return verify(*view, service);
-    } catch (const std::bad_alloc&) {
-        return status::kNotAvailable;
-    }
+    return guardMemory([&] { return verify(*view, service); });
 }
 
 trust::Status _satchel_copy_certificates(ByteView block, std::vector<trust::CertificateRef>* certificates,
@@ -198,11 +204,11 @@ trust::Status _satchel_create_cert_policy(trust::PolicyRef* policy, trust::Trust
         case trust::NamedPolicyOutcome::unavailable:
             break;
     }
-    return createLocalPolicy(policy);
+    return guardMemory([&] { return createLocalPolicy(policy); });
 }
 
 trust::Status _satchel_fuse_option(Dictionary& options, std::string_view key, Value value) {
-    try {
+    return guardMemory([&] {
         const auto present = options.find(key);
         if (present == options.end()) {
             options.emplace(key, std::move(value));
@@ -219,9 +225,7 @@ trust::Status _satchel_fuse_option(Dictionary& options, std::string_view key, Va
         fused.push_back(std::move(value));
         present->second = Value(std::move(fused));
         return status::kSuccess;
-    } catch (const std::bad_alloc&) {
-        return status::kNotAvailable;
-    }
+    });
 }
 
 trust::Status _satchel_create_trust(const std::vector<trust::CertificateRef>& certificates,
