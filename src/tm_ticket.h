@@ -8,9 +8,8 @@
 //   6       2              hash length, 20 or 48
 //   8       4              number of entries
 //   12      4              flags: bit 0 means revoked, the others have no meaning
-//   16      8              signature time; carried, never interpreted (tickets of our own making: seconds
-//   since
-//                          1970-01-01 00:00:00 UTC)
+//   16      8              signature time; carried, never interpreted (in tickets of our own making, the
+//                          seconds since 1970-01-01 00:00:00 UTC)
 //   24      n x entrySize  entries
 //
 // An entry of version 1 is a hash; one of version 2 is an algorithm byte, then a hash. The payload is exactly

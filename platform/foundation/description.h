@@ -83,9 +83,7 @@ struct Description<Error> {
 };
 template <>
 struct Description<Value> {
-    static std::string of(const Value& value) {
-        return value.string() != nullptr ? escapeForTerminal(*value.string()) : value.describe(0);
-    }
+    static std::string of(const Value& value);  // as what it holds, not as a token of a property list
 };
 template <>
 struct Description<Array> {

@@ -70,7 +70,7 @@ constexpr Conversion scanConversion(std::string_view format, std::size_t start) 
 
 template <class T>
 constexpr bool fits(ArgumentKind wants) {
-    using U = std::remove_cvref_t<std::decay_t<T>>;
+    using U = std::decay_t<const T>;
     switch (wants) {
         case ArgumentKind::object: return Describable<U>;
         case ArgumentKind::int8: return std::is_integral_v<U> && sizeof(U) == 1;
@@ -89,7 +89,7 @@ struct Argument {
 
 template <class T>
 Argument makeArgument(const T& value) {
-    using U = std::remove_cvref_t<std::decay_t<T>>;
+    using U = std::decay_t<const T>;
     if constexpr (std::is_integral_v<U>) {
         return {static_cast<std::uint64_t>(value), {}};
     } else if constexpr (Describable<U>) {
@@ -129,7 +129,8 @@ class FormatString {
     constexpr std::string_view text() const noexcept { return text_; }
 
   private:
-    static consteval bool argumentFits(std::size_t index, format_detail::ArgumentKind wants) {
+    static consteval bool argumentFits(std::size_t index,
+                                       [[maybe_unused]] format_detail::ArgumentKind wants) {
         const std::array<bool, sizeof...(Args) + 1> fitting{format_detail::fits<Args>(wants)..., false};
         return index < sizeof...(Args) && fitting[index];
     }

@@ -153,6 +153,20 @@ void RecordingFileManager::answerCloning(bool answer) {
     record_->answerCloning(answer);
 }
 
+void RecordingFileManager::answerTrash(const URL& location) {
+    trashLocation_ = location;
+}
+
+void RecordingFileManager::answerTemporaryDirectory(const URL& directory) {
+    temporaryDirectory_ = directory;
+}
+
+std::size_t RecordingFileManager::count(std::string_view name) const {
+    const auto all = record_->operations();
+    return static_cast<std::size_t>(std::count_if(
+        all.begin(), all.end(), [&](const FileOperation& operation) { return operation.name == name; }));
+}
+
 std::vector<FileOperation> RecordingFileManager::operations() const {
     return record_->operations();
 }
@@ -214,6 +228,7 @@ Result<void> RecordingFileManager::replaceItem(const URL& original, const URL& r
 
 Result<URL> RecordingFileManager::trashItem(const URL& item) {
     if (auto failure = record_->note("trashItem", item.path())) return *failure;
+    if (trashLocation_) return *trashLocation_;
     const URL place =
         URL::fileURLWithPath(record_->freshTrashDirectory()).appendingPathComponent(item.lastPathComponent());
     if (std::rename(item.path().c_str(), place.path().c_str()) != 0) return Error::posix(errno, item.path());
@@ -241,7 +256,7 @@ RecordingFileManager::OpenedHandle RecordingFileManager::openForUpdating(const U
 }
 
 URL RecordingFileManager::temporaryDirectory() {
-    return real_->temporaryDirectory();
+    return temporaryDirectory_ ? *temporaryDirectory_ : real_->temporaryDirectory();
 }
 
 RecordingFileManager::OpenedHandle RecordingFileManager::recordingHandle(OpenedHandle opened,

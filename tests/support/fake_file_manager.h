@@ -2,6 +2,7 @@
 #pragma once
 
 #include <memory>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -27,7 +28,7 @@ files::ItemType plainTypeNaming(const files::ItemFacts& facts);
 
 /// Passes every call on to a file manager that works on real files, writes it down first, and lets the test
 /// decide that it fails instead. The trash is a directory of its own: what is trashed never leaves the test.
-/// May be used from several threads; its handles may outlive it.
+/// May be used from several threads once it is set up; its handles may outlive it.
 class RecordingFileManager final : public files::FileManager {
   public:
     explicit RecordingFileManager(files::TypeNaming typeNaming = plainTypeNaming);
@@ -42,6 +43,15 @@ class RecordingFileManager final : public files::FileManager {
 
     /// What volumeSupportsCloning answers, whatever the file system would say.
     void answerCloning(bool answer);
+
+    /// Where trashItem says that an item is now, without moving it there.
+    void answerTrash(const files::URL& location);
+
+    /// What temporaryDirectory answers.
+    void answerTemporaryDirectory(const files::URL& directory);
+
+    /// How often that operation was called.
+    std::size_t count(std::string_view name) const;
 
     /// All operations so far, in order, those that failed included.
     std::vector<FileOperation> operations() const;
@@ -76,6 +86,8 @@ class RecordingFileManager final : public files::FileManager {
 
     std::unique_ptr<files::FileManager> real_;
     std::shared_ptr<Record> record_;
+    std::optional<files::URL> trashLocation_;
+    std::optional<files::URL> temporaryDirectory_;
 };
 
 }  // namespace pinwell::test

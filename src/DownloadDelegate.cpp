@@ -1,0 +1,122 @@
+// Ticket acceptance and the report of the run's result.
+
+#include "src/DownloadDelegate.h"
+
+#include <algorithm>
+#include <limits>
+#include <span>
+
+#include "src/messages.h"
+#include "src/tm_ticket.h"
+
+namespace pinwell {
+namespace {
+
+// Hands the error of the last step to a caller that wants it.
+void handOut(ErrorOut error, std::optional<Error> value) {
+    if (error != nullptr) *error = std::move(value);
+}
+
+bool listsCDHash(const tm_ticket* ticket, const Data& wanted) {
+    const std::uint32_t count = tm_ticket_get_cdhash_count(ticket);
+    for (std::uint32_t index = 0; index < count; ++index) {
+        tm_cdhash entry{};
+        if (tm_ticket_copy_cdhash(ticket, index, &entry) != 0) continue;
+        // The size that the algorithm stands for decides, not the record's own length.
+        const auto hash = std::span(entry.hash).first(tm_cdhash_algorithm_get_size(entry.algorithm));
+        if (std::equal(hash.begin(), hash.end(), wanted.begin(), wanted.end())) return true;
+    }
+    return false;
+}
+
+}  // namespace
+
+DownloadDelegate::DownloadDelegate(std::shared_ptr<PWHashedFile> hashedFile, const Platform& platform)
+    : hashedFile_(std::move(hashedFile)), platform_(platform) {}
+
+std::string DownloadDelegate::fileName() const { return hashedFile_->fileURL()->lastPathComponent(); }
+
+std::string DownloadDelegate::prettyHashString() {
+    const Data hash = hashedFile_->cdHash().value_or(Data{});
+    return foundation::format("%d/%@", hashedFile_->digestAlgorithm(), foundation::toHex(hash));
+}
+
+bool DownloadDelegate::isValidTicketData(const std::optional<Data>& data) {
+    hashedFile_->setAppropriateExitCode(kExitDataError);
+    if (!data || data->empty()) return false;
+    if (data->size() > std::numeric_limits<std::uint32_t>::max()) return false;
+
+    tm_ticket* decoded = nullptr;
+    if (satchel_get_validated_tm_ticket(data->data(), data->size(), &decoded, platform_.trust) != 0) return false;
+    const tm_ticket_ptr ticket(decoded);
+    if (ticket == nullptr) return false;
+
+    if ((tm_ticket_get_flags(ticket.get()) & kTicketRevoked) != 0) {
+        hashedFile_->setRevoked(true);
+        hashedFile_->setAppropriateExitCode(kExitNoPermission);
+        return false;
+    }
+    const auto wanted = hashedFile_->cdHash();
+    if (!wanted || !listsCDHash(ticket.get(), *wanted)) return false;
+    hashedFile_->setAppropriateExitCode(kExitOK);
+    return true;
+}
+
+bool DownloadDelegate::isExistingTicketValid() { return isValidTicketData(hashedFile_->ticketData()); }
+
+void DownloadDelegate::writeDownloadedData(const std::optional<Data>& data, ErrorOut error) {
+    if (!data) {
+        const Error badParameter = Error::osStatus(foundation::kParameterError);
+        MessageLog("Could not save data. %@", badParameter.localizedDescription());
+        handOut(error, badParameter);
+        return;
+    }
+    NoisyLog("Downloaded ticket has been stored at %@.", tempFileURL_);
+    const auto stored =
+        platform_.files.writeFile(*data, *tempFileURL_, files::FileManager::Writing::atomic);
+    if (!stored) {
+        MessageLog("Could not write ticket to %@ due to %@", tempFileURL_, stored.error());
+        hashedFile_->setAppropriateExitCode(kExitCannotCreate);
+        handOut(error, stored.error());
+        return;
+    }
+    handOut(error, std::nullopt);
+    if (!isValidTicketData(data)) {
+        MessageLog("Could not validate ticket for %@", hashedFile_->fileURL()->path());
+        return;
+    }
+    if (operation_ != kOperationStaple) {
+        hashedFile_->setAppropriateExitCode(kExitOK);
+        return;
+    }
+    if (hashedFile_->writeNewTicketDataFromURL(*tempFileURL_, error))
+        hashedFile_->setAppropriateExitCode(kExitOK);
+}
+
+void DownloadDelegate::notifyResult() {
+    if (operation_ == kOperationStaple && hashedFile_->appropriateExitCode() == kExitOK) {
+        // From the disk, by a new object: the old one's caches describe the file as it was.
+        const URL url = *hashedFile_->fileURL();
+        const auto fresh = PWHashedFile::initWithFileURL(url, platform_);
+        if (fresh != nullptr) setHashedFile(fresh);
+        const bool readable = fresh != nullptr && fresh->appropriateExitCode() == kExitOK;
+        if (!readable || !isExistingTicketValid()) {
+            MessageLog(
+                "Although we wrote the ticket, the written data did not validate. Please restore %@ from backup to "
+                "try again.",
+                url.path());
+            hashedFile_->setAppropriateExitCode(kExitCannotCreate);
+        }
+    }
+    const std::int32_t status = hashedFile_->appropriateExitCode();
+    if (hashedFile_->revoked()) {
+        MessageLog("The ticket for %@ has been revoked. Tollmark will prevent it from running.", fileName());
+    } else {
+        MessageLog("The %@ action %@!%@", operation_ == kOperationStaple ? "staple and validate" : "validate",
+                   status == kExitOK ? "worked" : "failed",
+                   status == kExitOK ? std::string() : foundation::format(" Error %d.", status));
+    }
+    platform_.exitProcess(status);
+}
+
+}  // namespace pinwell

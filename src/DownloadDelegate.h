@@ -1,0 +1,108 @@
+// The controller of one run: looks the ticket up, judges the server and the ticket, staples it, and reports.
+//
+// Made once by main and kept for the whole run. grabTicket runs on the main thread; the callbacks run on the serial
+// queue of the session they belong to, one at a time, while the main thread waits. Every run that gets as far as the
+// network ends in notifyResult, all but one: a large download that fails leaves the process waiting.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "foundation/value.h"
+#include "https/session.h"
+#include "src/PWHashedFile/PWHashedFile.h"
+#include "src/platform.h"
+
+namespace pinwell {
+
+inline constexpr std::uint8_t kOperationNone = 0;
+inline constexpr std::uint8_t kOperationStaple = 1;
+inline constexpr std::uint8_t kOperationValidate = 2;
+
+class DownloadDelegate : public https::SessionDelegate {
+  public:
+    DownloadDelegate(std::shared_ptr<PWHashedFile> hashedFile, const Platform& platform);
+
+    /// Only the test for staple is ever made: every other value behaves as validate.
+    std::uint8_t operation() const noexcept { return operation_; }
+    void setOperation(std::uint8_t operation) noexcept { operation_ = operation; }
+
+    /// Declared for the interface's sake; they have no effect.
+    bool dryrun() const noexcept { return dryrun_; }
+    void setDryrun(bool dryrun) noexcept { dryrun_ = dryrun; }
+    bool force() const noexcept { return force_; }
+    void setForce(bool force) noexcept { force_ = force; }
+
+    /// The artefact; a fresh object for the same URL after a staple.
+    const std::shared_ptr<PWHashedFile>& hashedFile() const noexcept { return hashedFile_; }
+    void setHashedFile(std::shared_ptr<PWHashedFile> file) { hashedFile_ = std::move(file); }
+
+    /// Where a downloaded ticket is kept.
+    const std::optional<URL>& tempFileURL() const noexcept { return tempFileURL_; }
+    void setTempFileURL(std::optional<URL> url) { tempFileURL_ = std::move(url); }
+
+    /// The announced size of a large ticket; nil until the response names one, and whatever it names.
+    const foundation::Value& largeTicketSize() const noexcept { return largeTicketSize_; }
+    void setLargeTicketSize(foundation::Value size) { largeTicketSize_ = std::move(size); }
+
+    // Lookup.
+
+    /// True when asynchronous work has started that will end the process; false when the caller ends it with the
+    /// hashed file's exit code, or 1 when that is 0.
+    bool grabTicket();
+
+    /// The lookup's completion handler.
+    void lookupDidComplete(const std::optional<Data>& data, const std::optional<https::HTTPResponse>& response,
+                           const std::optional<Error>& error);
+
+    // Large tickets.
+
+    /// True when the download is running.
+    bool asynchronouslyDownloadLargeTicketFromURLString(const std::string& urlTemplate);
+
+    void didFinishDownloading(https::Session& session, https::Task& task, const URL& location) override;
+    void didComplete(https::Session& session, https::Task& task, const std::optional<Error>& error) override;
+
+    // Server trust.
+
+    void didReceiveChallenge(https::Session& session, const https::AuthenticationChallenge& challenge,
+                             const https::ChallengeCompletion& completion) override;
+
+    // Acceptance and report.
+
+    /// Whether the ticket is genuine, not revoked, and lists the file's cdhash. Records the exit code, prints nothing.
+    bool isValidTicketData(const std::optional<Data>& data);
+    bool isExistingTicketValid();
+
+    /// Keeps the ticket in the temporary directory, judges it, and staples it when that is the operation. The
+    /// outcome is the exit code on the hashed file; `error` receives the last step's error.
+    void writeDownloadedData(const std::optional<Data>& data, ErrorOut error);
+
+    /// "2/0a1b...": how messages name the file's hash.
+    std::string prettyHashString();
+
+    /// Checks what was written, prints the outcome and ends the process.
+    void notifyResult();
+
+  private:
+    std::optional<URL> lookupURL(std::optional<Error>& error) const;
+    std::string recordName();
+    std::optional<Data> ticketFromResponse(const foundation::Value& response, bool& downloading);
+    std::string fileName() const;
+
+    std::uint8_t operation_ = kOperationNone;
+    bool dryrun_ = false;
+    bool force_ = false;
+    std::shared_ptr<PWHashedFile> hashedFile_;
+    std::optional<URL> tempFileURL_;
+    foundation::Value largeTicketSize_;
+
+    Platform platform_;
+    std::shared_ptr<https::Session> lookupSession_;  // kept for the life of the process: never invalidated
+    std::shared_ptr<https::Session> downloadSession_;
+    std::shared_ptr<https::Task> downloadTask_;
+};
+
+}  // namespace pinwell

@@ -1,0 +1,60 @@
+// Tickets too large to stand in their record: fetched as a file of their own.
+
+#include "foundation/byte_count.h"
+#include "src/DownloadDelegate.h"
+#include "src/messages.h"
+
+namespace pinwell {
+namespace {
+
+constexpr std::string_view kFileNameToken = "${f}";
+constexpr std::string_view kAssetFileName = "lmasset.ticket";
+constexpr int kHTTPStatusOK = 200;
+
+std::string replacingAll(std::string text, std::string_view token, std::string_view replacement) {
+    for (std::size_t at = text.find(token); at != std::string::npos; at = text.find(token, at + replacement.size()))
+        text.replace(at, token.size(), replacement);
+    return text;
+}
+
+}  // namespace
+
+bool DownloadDelegate::asynchronouslyDownloadLargeTicketFromURLString(const std::string& urlTemplate) {
+    const std::string text = replacingAll(urlTemplate, kFileNameToken, kAssetFileName);
+    https::Request request;
+    request.url = URL::fromString(text);
+    if (!request.url) MessageLog("Large ticket was requested from an invalid URL: %@", request.url);
+    NoisyLog("URL of large ticket asset: %@", text);
+    downloadSession_ = platform_.https.ephemeralSession(*this);
+    downloadTask_ = downloadSession_->downloadTask(std::move(request));
+    downloadTask_->resume();
+    return downloadTask_->state() == https::TaskState::running;
+}
+
+void DownloadDelegate::didFinishDownloading(https::Session&, https::Task& task, const URL& location) {
+    const auto data = platform_.files.contentsOfFile(location).asOptional();
+    const std::size_t length = data ? data->size() : 0;
+    const auto response = task.response();
+    if (length != largeTicketSize_.unsignedIntegerValue()) {
+        MessageLog("We were expecting a ticket size of %@ but download a ticket of size %lu", largeTicketSize_, length);
+        hashedFile_->setAppropriateExitCode(kExitDataError);
+    } else if (response && response->status != kHTTPStatusOK) {
+        MessageLog("Attempting to download larger ticket for %@ failed. %@", fileName(),
+                   https::localizedStringForStatusCode(response->status));
+        hashedFile_->setAppropriateExitCode(kExitNoHost);
+    } else {
+        NoisyLog("Big ticket response is %@", response);
+        NoisyLog("Downloaded large ticket size is %@", foundation::formatByteCount(length));
+        writeDownloadedData(data, nullptr);
+    }
+    notifyResult();
+}
+
+void DownloadDelegate::didComplete(https::Session&, https::Task&, const std::optional<Error>& error) {
+    if (!error) return;
+    MessageLog("Large ticket for %@ failed to download. %@", hashedFile_->fileURL()->path(),
+               error->localizedFailureReason());
+    hashedFile_->setAppropriateExitCode(kExitNoHost);
+}
+
+}  // namespace pinwell

@@ -1,0 +1,69 @@
+// Which servers may answer: one that satisfies either of the two server policies for the host being contacted.
+
+#include <vector>
+
+#include "src/DownloadDelegate.h"
+#include "src/messages.h"
+
+namespace pinwell {
+namespace {
+
+bool isSuccess(trust::Verdict verdict) {
+    return verdict == trust::Verdict::proceed || verdict == trust::Verdict::unspecified;
+}
+
+void reportRefusal(const trust::Trust& serverTrust, trust::Verdict verdict) {
+    const foundation::Array properties = serverTrust.copyProperties();
+    MessageLog("Certificate trust evaluation did not return expected result. (%d) %@",
+               static_cast<std::uint32_t>(verdict), serverTrust.copyFailureDescription().value_or(std::string()));
+    for (const foundation::Value& certificate : properties) {
+        const foundation::Value& error = certificate[trust::kPropertyError];
+        if (error.isNil()) continue;
+        MessageLog("Certificate trust evaluation for %@ did not return expected result. %@.",
+                   certificate[trust::kPropertyTitle], error);
+    }
+}
+
+bool accepts(trust::Trust& serverTrust, const trust::PolicyRef& policy) {
+    if (const trust::Status status = serverTrust.setPolicy(policy); status != trust::kSuccess) {
+        NoisyLog("Could not set trust policy. %@", Error::osStatus(status));
+        return false;
+    }
+    auto verdict = trust::Verdict::invalid;
+    if (const trust::Status status = serverTrust.evaluate(verdict); status != trust::kSuccess) {
+        MessageLog("Certificate trust evaluation failed. %@", Error::osStatus(status));
+        return false;
+    }
+    if (isSuccess(verdict)) return true;
+    reportRefusal(serverTrust, verdict);
+    return false;
+}
+
+}  // namespace
+
+void DownloadDelegate::didReceiveChallenge(https::Session&, const https::AuthenticationChallenge& challenge,
+                                           const https::ChallengeCompletion& completion) {
+    NoisyLog("Domain is %@", challenge.host);
+    if (challenge.method != https::AuthenticationMethod::serverTrust) {
+        completion(https::Disposition::performDefaultHandling, std::nullopt);
+        return;
+    }
+    std::vector<trust::PolicyRef> policies;
+    for (auto policy : {trust::createPinnedServerPolicy(challenge.host),
+                        trust::createCompatibilityServerPolicy(challenge.host)})
+        if (policy != nullptr) policies.push_back(std::move(policy));
+    if (policies.empty()) {
+        completion(https::Disposition::cancelChallenge, std::nullopt);
+        return;
+    }
+    for (const trust::PolicyRef& policy : policies) {
+        if (accepts(*challenge.serverTrust, policy)) {
+            completion(https::Disposition::useCredential, https::Credential{challenge.serverTrust});
+            return;
+        }
+    }
+    MessageLog("Could not establish secure connection to %@", challenge.host);
+    completion(https::Disposition::cancelChallenge, std::nullopt);
+}
+
+}  // namespace pinwell

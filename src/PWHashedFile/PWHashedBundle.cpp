@@ -1,0 +1,68 @@
+#include "src/PWHashedFile/PWHashedBundle.h"
+
+#include "foundation/process.h"
+#include "src/cdhash_extract.h"
+#include "src/messages.h"
+
+namespace pinwell {
+
+URL PWHashedBundle::codeResourcesURL() const {
+    return fileURL()->appendingPathComponent("Contents").appendingPathComponent("CodeResources");
+}
+
+std::optional<Data> PWHashedBundle::_ticketData() {
+    const URL ticket = codeResourcesURL();
+    const auto isRegular = platform().files.isRegularFile(ticket);
+    if (!isRegular || !*isRegular) return std::nullopt;
+    return platform().files.contentsOfFile(ticket).asOptional();
+}
+
+std::optional<Data> PWHashedBundle::_cdHash() {
+    const foundation::Value properties = basicCodeProperties(*fileURL(), platform());
+    const auto algorithm = properties[kDigestAlgorithmKey].unsignedIntegerValue();
+    setDigestAlgorithm(static_cast<std::uint32_t>(algorithm));
+    NoisyLog("Props are %@", properties);
+    const Data* hash = properties[kCDHashKey].data();
+    return hash == nullptr ? std::nullopt : std::optional(*hash);
+}
+
+bool PWHashedBundle::writeNewTicketDataFromURL(const URL& source, ErrorOut error) {
+    files::FileManager& files = platform().files;
+    const URL ticket = codeResourcesURL();
+    const auto fail = [&](std::optional<Error> reason) {
+        setAppropriateExitCode(kExitCannotCreate);
+        if (error != nullptr) *error = std::move(reason);
+        return false;
+    };
+
+    if (const auto isRegular = files.isRegularFile(ticket); isRegular && !*isRegular) {
+        NoisyLog("%@ will not replace the compatibility symlink at %@. Please remove it manually",
+                 foundation::processName(), ticket);
+        return fail(std::nullopt);
+    }
+    if (!files.copyItem(source, ticket)) {
+        if (const auto removed = files.removeItem(ticket); !removed) {
+            NoisyLog("Could not remove existing ticket from %@ because an error occurred. %@", ticket,
+                     removed.error());
+            return fail(removed.error());
+        }
+        if (const auto copied = files.copyItem(source, ticket); !copied) {
+            NoisyLog("Could not save ticket to %@ because an error occurred. %@", ticket, copied.error());
+            return fail(copied.error());
+        }
+    }
+    setAppropriateExitCode(kExitOK);
+    return true;
+}
+
+bool PWHashedBundle::_deleteExistingTicket() {
+    const auto trashed = platform().files.trashItem(codeResourcesURL());
+    if (!trashed) {
+        NoisyLog("Could not delete ticket %@. %@", codeResourcesURL(), trashed.error());
+        return false;
+    }
+    NoisyLog("Successfully moved ticket to trash. Find it at %@", *trashed);
+    return true;
+}
+
+}  // namespace pinwell

@@ -1,0 +1,108 @@
+#include "src/PWHashedFile/PWHashedFile.h"
+
+#include "src/PWHashedFile/PWHashedBundle.h"
+#include "src/PWHashedFile/file_kind.h"
+#include "src/messages.h"
+
+namespace pinwell {
+
+PWHashedFile::PWHashedFile(std::optional<URL> fileURL, const Platform& platform)
+    : fileURL_(std::move(fileURL)), platform_(platform) {}
+
+std::shared_ptr<PWHashedFile> PWHashedFile::initWithFileURL(const URL& fileURL, const Platform& platform) {
+    const auto properties = platform.files.resourceProperties(fileURL);
+    if (!properties) {
+        MessageLog("File %@ does not exist. %@", fileURL.path(), properties.error());
+        auto unreadable = std::make_shared<PWHashedFile>(fileURL, platform);
+        unreadable->setAppropriateExitCode(kExitNoInput);
+        return unreadable;
+    }
+    MessageLog("Processing: %@", fileURL.path());
+    NoisyLog("Properties are %@", properties->dictionary());
+
+    switch (assessmentClassForUTI(platform.types, properties->typeIdentifier, fileURL.pathExtension())) {
+        case AssessmentClass::bundle: return std::make_shared<PWHashedBundle>(fileURL, platform);
+        case AssessmentClass::package:
+        case AssessmentClass::diskImage: break;
+        case AssessmentClass::unknown:
+            if (properties->isDirectory && platform.files.mainExecutableOfBundle(fileURL))
+                return std::make_shared<PWHashedBundle>(fileURL, platform);
+            break;
+    }
+    MessageLog("Pinwell is incapable of working with %@ files.", properties->localizedTypeDescription);
+    return nullptr;
+}
+
+std::optional<Data> PWHashedFile::cached(std::optional<Data>& cache, std::optional<Data> (PWHashedFile::*hook)()) {
+    {
+        const std::lock_guard lock(mutex_);
+        if (!cache) cache = (this->*hook)().value_or(Data{});
+    }
+    // Read without the lock: once set, a cache never changes.
+    return cache->empty() ? std::nullopt : cache;
+}
+
+std::optional<Data> PWHashedFile::ticketData() { return cached(internalTicketData_, &PWHashedFile::_ticketData); }
+std::optional<Data> PWHashedFile::cdHash() { return cached(internalCDHash_, &PWHashedFile::_cdHash); }
+
+bool PWHashedFile::writeNewTicketDataFromURL(const URL& source, ErrorOut error) {
+    NoisyLog("Attempting to attach a new ticket to %@. Let's see how that works out.", fileURL_->lastPathComponent());
+    return common_writeNewTicketDataFromURL(source, false, error);
+}
+
+bool PWHashedFile::_deleteExistingTicket(ErrorOut error) {
+    NoisyLog("Attempting to delete the existing ticket attatched %@. Let's see how that works out.",
+             fileURL_->lastPathComponent());
+    return common_writeNewTicketDataFromURL(std::nullopt, true, error);
+}
+
+// The copy to work on; nothing when none can be had, and then the write goes in place.
+std::optional<URL> PWHashedFile::makeWorkingCopy() {
+    const auto directory = platform_.files.createReplacementDirectory(*fileURL_);
+    if (!directory) {
+        NoisyLog("Could not create replacement directory for %@. %@", fileURL_->path(), directory.error());
+        return std::nullopt;
+    }
+    const URL copy = directory->appendingPathComponent(fileURL_->lastPathComponent());
+    if (const auto copied = platform_.files.copyItem(*fileURL_, copy); !copied) {
+        NoisyLog("Could not copy backup to %@. %@", fileURL_->path(), copied.error());
+        return std::nullopt;
+    }
+    NoisyLog("Cloned %@ to %@", fileURL_->path(), copy.path());
+    return copy;
+}
+
+bool PWHashedFile::common_writeNewTicketDataFromURL(const std::optional<URL>& source, bool deleteExisting,
+                                                    ErrorOut error) {
+    const auto cloning = platform_.files.volumeSupportsCloning(*fileURL_);
+    const bool canClone = cloning && *cloning;
+    const std::optional<URL> copy = canClone ? makeWorkingCopy() : std::nullopt;
+
+    std::optional<Error> writeError;  // not handed out: this driver reports the swap's error only
+    if (!_writeNewTicketDataFromURL(source, copy.value_or(*fileURL_), deleteExisting, &writeError)) return false;
+    if (!copy) return true;
+
+    std::optional<Error> reported;
+    if (const auto replaced = platform_.files.replaceItem(*fileURL_, *copy); replaced) {
+        if (const auto trashed = platform_.files.trashItem(*copy); trashed)
+            NoisyLog("Successfully trashed %@!!!", *trashed);
+    } else {
+        NoisyLog("Could not replace %@ with the safetly modified file at %@. %@", fileURL_->path(), *copy,
+                 replaced.error());
+        reported = replaced.error();
+    }
+    if (error != nullptr) *error = reported;
+    return true;
+}
+
+void PWHashedFile::mustOverride(std::string_view operation) const {
+    throw InternalInconsistency(foundation::format("You must override %@ in the %@ subclass", operation, className()));
+}
+
+std::optional<Data> PWHashedFile::_ticketData() { mustOverride("_ticketData"); }
+std::optional<Data> PWHashedFile::_cdHash() { mustOverride("_cdHash"); }
+bool PWHashedFile::_writeNewTicketDataFromURL(const std::optional<URL>&, const URL&, bool, ErrorOut) {
+    mustOverride("_writeNewTicketDataFromURL:intoURL:deleteExisting:error:");
+}
+
+}  // namespace pinwell

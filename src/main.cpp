@@ -1,0 +1,118 @@
+// The entry point: options, the operation and the path, and the hand-off to the controller.
+
+#include <getopt.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <cstdlib>
+#include <string>
+#include <string_view>
+
+#include "foundation/process.h"
+#include "foundation/run_loop.h"
+#include "src/DownloadDelegate.h"
+#include "src/messages.h"
+#include "src/type_naming.h"
+
+namespace {
+
+using namespace pinwell;
+
+constexpr int kExitNothingRecorded = 1;
+
+// The operation of the run, and the long options; process-wide, as the option scan is.
+std::uint8_t operation = kOperationNone;
+
+constexpr option options[] = {
+    {"help", no_argument, nullptr, '?'},
+    {"quiet", no_argument, nullptr, 'q'},
+    {"verbose", no_argument, nullptr, 'v'},
+    {nullptr, 0, nullptr, 0},
+};
+
+void printUsage() {
+    const std::string program = foundation::processName();
+    const std::string usage = foundation::format(
+        "Usage: %s staple [-q] [-v] path\n"
+        "        Retrieves a ticket and attaches it to the supported file\n"
+        "        format at path.\n"
+        "\n"
+        "Usage: %s validate [-q] [-v] path\n"
+        "        Validates an existing stapled ticket.\n"
+        "\n"
+        "Supported file formats are: UDIF disk images, code-signed executable\n"
+        "bundles, and signed \"flat\" installer packages.\n",
+        program, program);
+    // A standard error that is closed loses the text and nothing else.
+    [[maybe_unused]] const ssize_t written = ::write(STDERR_FILENO, usage.data(), usage.size());
+}
+
+void scanOptions(int argc, char** argv) {
+    opterr = 0;  // the usage text says it all
+    for (int found = 0; (found = getopt_long(argc, argv, "qv", options, nullptr)) != -1;) {
+        switch (found) {
+            case 'q': verboseLevel = kVerbosityQuiet; break;
+            case 'v': verboseLevel = kVerbosityVerbose; break;
+            case '?': printUsage(); break;
+            default: break;
+        }
+    }
+}
+
+std::uint8_t operationForCommand(std::string_view command) {
+    if (command == "validate") return kOperationValidate;
+    if (operation == kOperationNone && command == "staple") return kOperationStaple;
+    return kOperationNone;
+}
+
+int run(const URL& path) {
+    const auto directory = foundation::PlatformDirectory::current();
+    const auto systemLog = syslog::makeSystemLog();
+    const auto types = types::makeTypeService();
+    const auto files = files::makeLocalFileManager(
+        [&types](const files::ItemFacts& facts) { return nameType(*types, facts); });
+    const auto codeSigning = codesign::makeCodeSigningService();
+    const auto trust = trust::makeTrustService(
+        directory, [&systemLog](std::string_view line) { systemLog->error(line); });
+    const auto https = https::makeSessionService(*trust);
+    const auto userDefaults = defaults::makeUserDefaultsService();
+    const Platform platform{*files, *types,        *codeSigning, *trust,   *https,
+                            *userDefaults, *systemLog, directory,    [](int status) { std::exit(status); }};
+
+    const auto hashedFile = PWHashedFile::initWithFileURL(path, platform);
+    if (hashedFile == nullptr) return kExitNoInput;
+    if (hashedFile->appropriateExitCode() != kExitOK) return hashedFile->appropriateExitCode();
+
+    foundation::RunLoop mainRunLoop;
+    DownloadDelegate controller(hashedFile, platform);
+    controller.setOperation(operation);
+    if (controller.grabTicket()) {
+        mainRunLoop.run();
+        return kExitOK;
+    }
+    const int code = controller.hashedFile()->appropriateExitCode();
+    return code == kExitOK ? kExitNothingRecorded : code;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    // A reader that has gone away must not stop a staple half-way.
+    std::signal(SIGPIPE, SIG_IGN);
+
+    if (argc <= 2) {
+        printUsage();
+        return kExitUsage;
+    }
+    // As passed: the option scan moves the arguments about.
+    const std::string command = argv[1];
+    const std::string path = argv[argc - 1];
+    scanOptions(argc, argv);
+
+    operation = operationForCommand(command);
+    if (operation == kOperationNone) {
+        printUsage();
+        return kExitUsage;
+    }
+    return run(URL::fileURLWithPath(path));
+}

@@ -1,0 +1,45 @@
+#include "support/controller_run.h"
+
+#include <filesystem>
+#include <stdexcept>
+
+#include "foundation/base64.h"
+#include "src/PWHashedFile/PWHashedBundle.h"
+
+namespace pinwell::test {
+namespace {
+
+std::shared_ptr<PWHashedFile> makeSignedBundle(TestPlatform& platform) {
+    writeFile(platform.directory / "App.app/Contents/MacOS/App", std::string_view("code"));
+    std::filesystem::create_directory(platform.directory / "tmp");
+    platform.codeSigning.information.emplace();
+    platform.codeSigning.information->unique = ControllerRun::fileHash();
+    platform.codeSigning.information->digestAlgorithm = 2;
+    return std::make_shared<PWHashedBundle>(platform.directory.url("App.app"), platform.services());
+}
+
+}  // namespace
+
+ControllerRun::ControllerRun() : file(makeSignedBundle(platform)), controller(file, platform.services()) {}
+
+const https::Request& ControllerRun::request() const {
+    return platform.https.sessions.at(0)->dataTasks.at(0)->request;
+}
+
+std::optional<int> ControllerRun::answer(std::string_view body, https::Headers headers, int status) {
+    https::HTTPResponse response{*foundation::URL::fromString("https://api.lumora.example/"), status,
+                                 std::move(headers)};
+    const auto completion = platform.https.sessions.at(0)->completions.at(0);
+    return platform.exitStatusOf([&] { completion(foundation::toData(body), response, std::nullopt); });
+}
+
+std::optional<int> ControllerRun::fail(const foundation::Error& error) {
+    const auto completion = platform.https.sessions.at(0)->completions.at(0);
+    return platform.exitStatusOf([&] { completion(std::nullopt, std::nullopt, error); });
+}
+
+std::string ControllerRun::inlineAnswer(const foundation::Data& ticket) {
+    return R"({"records":[{"fields":{"signedTicket":{"value":")" + foundation::encodeBase64(ticket) + R"("}}}]})";
+}
+
+}  // namespace pinwell::test

@@ -1,0 +1,41 @@
+// One run of the controller over a bundle, with the test in the place of the network.
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "src/DownloadDelegate.h"
+#include "support/test_platform.h"
+
+namespace pinwell::test {
+
+/// A bundle App.app whose cdhash is 20 bytes of 0xAB under algorithm 2, and a controller for it.
+class ControllerRun {
+  public:
+    ControllerRun();
+
+    static foundation::Data fileHash() { return foundation::Data(20, std::byte{0xAB}); }
+    static constexpr const char* kPrettyHash = "2/abababababababababababababababababababab";
+
+    std::string artefact() const { return platform.directory / "App.app"; }
+    std::string stapledPath() const { return platform.directory / "App.app/Contents/CodeResources"; }
+    void staple(const foundation::Data& ticket) { writeFile(stapledPath(), foundation::ByteView(ticket)); }
+
+    /// The request of the lookup's one task; fails the test when there is none.
+    const https::Request& request() const;
+
+    /// Answers the lookup; what the process ends with.
+    std::optional<int> answer(std::string_view body, https::Headers headers = {{"X-Ostrel-Request-UUID", "REQUEST"}},
+                              int status = 200);
+    std::optional<int> fail(const foundation::Error& error);
+
+    /// A lookup answer with the ticket inline.
+    static std::string inlineAnswer(const foundation::Data& ticket);
+
+    TestPlatform platform;
+    std::shared_ptr<PWHashedFile> file;
+    DownloadDelegate controller;
+};
+
+}  // namespace pinwell::test

@@ -1,0 +1,59 @@
+// A whole platform of fakes around a real directory: what a unit test of the tool runs on.
+//
+// Code signing, trust, sessions, user defaults and the system log answer what the test says; files and types are
+// real, below a temporary directory, with every file operation recorded. The end of the process is an exception.
+#pragma once
+
+#include <optional>
+
+#include "foundation/platform_directory.h"
+#include "src/platform.h"
+#include "support/fake_code_signing.h"
+#include "support/fake_file_manager.h"
+#include "support/fake_sessions.h"
+#include "support/fake_system_log.h"
+#include "support/fake_trust_service.h"
+#include "support/fake_user_defaults.h"
+#include "support/temporary_directory.h"
+
+namespace pinwell::test {
+
+/// The process would have ended here.
+struct ProcessExit {
+    int status;
+};
+
+class TestPlatform {
+  public:
+    TestPlatform();
+
+    /// References to the members below.
+    Platform services();
+
+    /// What `action` ends the process with; nothing when it returns.
+    template <class Action>
+    std::optional<int> exitStatusOf(Action&& action) {
+        try {
+            action();
+        } catch (const ProcessExit& exit) {
+            return exit.status;
+        }
+        return std::nullopt;
+    }
+
+    TemporaryDirectory directory;  // artefacts, the platform directory, and "tmp" for downloads
+    std::unique_ptr<types::TypeService> types;
+    RecordingFileManager files;
+    FakeCodeSigningService codeSigning;
+    FakeTrustService trust;
+    FakeSessionService https;
+    FakeUserDefaultsService userDefaults;
+    FakeSystemLog systemLog;
+    foundation::PlatformDirectory platformDirectory;
+};
+
+/// A ticket container that is well framed and whose payload lists `hashes` with algorithm 2, each of the payload's
+/// one hash length. Its certificates and signature are filler: only a trust service that accepts anything takes it.
+foundation::Data unsignedTicket(const std::vector<foundation::Data>& hashes, std::uint32_t flags = 0);
+
+}  // namespace pinwell::test

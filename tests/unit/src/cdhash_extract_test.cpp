@@ -1,0 +1,111 @@
+#include "src/cdhash_extract.h"
+
+#include <gtest/gtest.h>
+
+#include "support/message_capture.h"
+#include "support/test_platform.h"
+
+namespace pinwell {
+namespace {
+
+using foundation::Data;
+using foundation::Dictionary;
+using foundation::Value;
+
+class BasicCodeProperties : public testing::Test {
+  protected:
+    void SetUp() override {
+        codesign::SigningInformation information;
+        information.unique = Data(20, std::byte{0xAB});
+        information.digestAlgorithm = 2;
+        information.flags = 0x10002;
+        information.identifier = "com.example.app";
+        information.teamIdentifier = "TEAM123456";
+        information.secureTimestamp = foundation::Date{1795377300};
+        platform.codeSigning.information = information;
+    }
+
+    Value properties() {
+        return basicCodeProperties(foundation::URL::fileURLWithPath("/Some.app"), platform.services());
+    }
+
+    test::TestPlatform platform;
+};
+
+TEST_F(BasicCodeProperties, HoldEverythingThatTheSignatureNames) {
+    const Value all = properties();
+    EXPECT_EQ(all.dictionary()->size(), 6U);
+    EXPECT_EQ(all["cdhash"], Value(Data(20, std::byte{0xAB})));
+    EXPECT_EQ(all["digestAlgorithm"], Value(2));
+    EXPECT_EQ(all["flags"], Value(0x10002));
+    EXPECT_EQ(all["signingId"], Value("com.example.app"));
+    EXPECT_EQ(all["teamId"], Value("TEAM123456"));
+    EXPECT_EQ(all["secureTimestamp"], Value("2026-11-22 19:55:00 +0000"));
+}
+
+TEST_F(BasicCodeProperties, AskForTheSignatureAndItsStructureOnly) {
+    properties();
+    EXPECT_EQ(platform.codeSigning.validityFlags,
+              codesign::kDoNotValidateExecutable | codesign::kDoNotValidateResources);
+    EXPECT_EQ(platform.codeSigning.informationSets,
+              codesign::kInternalInformation | codesign::kSigningInformation | codesign::kContentInformation);
+}
+
+TEST_F(BasicCodeProperties, OfAnAdHocSignatureLackTheTeamAndHaveTheRest) {
+    platform.codeSigning.information->teamIdentifier.reset();
+    const Value all = properties();
+    EXPECT_TRUE(all["teamId"].isNil());
+    EXPECT_EQ(all.dictionary()->size(), 5U);
+}
+
+TEST_F(BasicCodeProperties, WithoutASecureTimestampLackIt) {
+    platform.codeSigning.information->secureTimestamp.reset();
+    EXPECT_TRUE(properties()["secureTimestamp"].isNil());
+    EXPECT_EQ(properties().dictionary()->size(), 5U);
+}
+
+TEST_F(BasicCodeProperties, OfUnsignedOrDamagedCodeAreEmptyAndSilent) {
+    platform.codeSigning.validity = codesign::kUnsigned;
+    const test::MessageCapture output(kVerbosityVerbose);
+    EXPECT_EQ(properties(), Value(Dictionary{}));
+    EXPECT_TRUE(platform.systemLog.entries().empty());
+    EXPECT_EQ(output.text(), "");
+}
+
+TEST_F(BasicCodeProperties, AreEmptyAndLoggedWhenThereIsNoCodeAtThePath) {
+    platform.codeSigning.createStatus = codesign::kStaticCodeNotFound;
+    EXPECT_EQ(properties(), Value(Dictionary{}));
+    ASSERT_EQ(platform.systemLog.entries().size(), 1U);
+    EXPECT_EQ(platform.systemLog.entries()[0], "Unable to create SecCode (-67070): /Some.app");
+}
+
+TEST_F(BasicCodeProperties, AreEmptyAndLoggedWhenSuccessComesWithoutACodeReference) {
+    platform.codeSigning.handsOutCode = false;
+    EXPECT_EQ(properties(), Value(Dictionary{}));
+    ASSERT_EQ(platform.systemLog.entries().size(), 1U);
+    EXPECT_EQ(platform.systemLog.entries()[0], "Unable to create SecCode (0): /Some.app");
+}
+
+TEST_F(BasicCodeProperties, AreEmptyAndLoggedWhenTheInformationCannotBeCopied) {
+    platform.codeSigning.copyStatus = -67030;
+    EXPECT_EQ(properties(), Value(Dictionary{}));
+    ASSERT_EQ(platform.systemLog.entries().size(), 1U);
+    EXPECT_EQ(platform.systemLog.entries()[0], "Unable to copy signing information (-67030)");
+}
+
+TEST_F(BasicCodeProperties, AreEmptyAndLoggedWhenNoInformationComesBack) {
+    platform.codeSigning.information.reset();
+    EXPECT_EQ(properties(), Value(Dictionary{}));
+    ASSERT_EQ(platform.systemLog.entries().size(), 1U);
+    EXPECT_EQ(platform.systemLog.entries()[0], "Unable to copy signing information from code reference.");
+}
+
+TEST_F(BasicCodeProperties, AreEmptyAndLoggedWithoutAUniqueHash) {
+    platform.codeSigning.information->unique.reset();
+    EXPECT_EQ(properties(), Value(Dictionary{}));
+    ASSERT_EQ(platform.systemLog.entries().size(), 1U);
+    EXPECT_EQ(platform.systemLog.entries()[0], "Unable to extract cdhash from signing information");
+}
+
+}  // namespace
+}  // namespace pinwell
