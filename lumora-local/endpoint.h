@@ -1,0 +1,41 @@
+// Hosts and ports as people and platform.json write them: "localhost", "localhost:8443", "[::1]:8443".
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+
+namespace pinwell::lumora {
+
+/// The port that `init` writes unless it is told another.
+inline constexpr std::uint16_t kDefaultPort = 8443;
+
+/// The port that an https address without a port means.
+inline constexpr std::uint16_t kHttpsPort = 443;
+
+/// A DNS name (RFC 1123 labels, 253 characters at most) in lower case, or an IPv4 or IPv6 address in its
+/// canonical text form and without brackets; nothing for any other text.
+std::optional<std::string> canonicalHost(std::string_view text);
+
+/// Whether a canonical host is an address rather than a name.
+bool isAddress(const std::string& host);
+
+/// Whether a canonical host is the address that stands for every interface.
+bool isWildcard(const std::string& host);
+
+struct Endpoint {
+    std::string host;  // canonical
+    std::uint16_t port = 0;
+
+    bool operator==(const Endpoint&) const = default;
+};
+
+/// "HOST:PORT", "[ADDRESS]:PORT", or either without the port, which is then `defaultPort`. A bare IPv6
+/// address is taken as a host without a port. Port 0 is allowed here: it asks for a free port.
+std::optional<Endpoint> parseEndpoint(std::string_view text, std::uint16_t defaultPort);
+
+/// "HOST:PORT", an IPv6 address in brackets.
+std::string toString(const Endpoint& endpoint);
+
+}  // namespace pinwell::lumora

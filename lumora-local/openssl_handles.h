@@ -1,0 +1,56 @@
+// Owning handles of OpenSSL objects, for the .cpp files that use them.
+#pragma once
+
+#include <openssl/bio.h>
+#include <openssl/err.h>
+#include <openssl/evp.h>
+#include <openssl/pem.h>
+#include <openssl/x509.h>
+#include <openssl/x509v3.h>
+
+#include <array>
+#include <memory>
+#include <string>
+
+#include "foundation/bytes.h"
+#include "foundation/format.h"
+#include "lumora-local/failure.h"
+
+namespace pinwell::lumora {
+
+template <auto Free>
+struct OpenSSLDeleter {
+    template <class T>
+    void operator()(T* object) const noexcept {
+        Free(object);
+    }
+};
+
+using KeyHandle = std::unique_ptr<EVP_PKEY, OpenSSLDeleter<EVP_PKEY_free>>;
+using CertificateHandle = std::unique_ptr<X509, OpenSSLDeleter<X509_free>>;
+using ExtensionHandle = std::unique_ptr<X509_EXTENSION, OpenSSLDeleter<X509_EXTENSION_free>>;
+using BioHandle = std::unique_ptr<BIO, OpenSSLDeleter<BIO_free_all>>;
+using DigestContextHandle = std::unique_ptr<EVP_MD_CTX, OpenSSLDeleter<EVP_MD_CTX_free>>;
+
+/// The library speaks of unsigned characters where we say bytes.
+inline const unsigned char* octets(foundation::ByteView bytes) {
+    return reinterpret_cast<const unsigned char*>(bytes.data());
+}
+inline unsigned char* octets(foundation::Data& data) {
+    return reinterpret_cast<unsigned char*>(data.data());
+}
+
+/// What the library last complained about, as the failure of `action`; its queue is empty afterwards.
+inline Failure openSSLFailure(std::string_view action) {
+    std::array<char, 256> text{};
+    ERR_error_string_n(ERR_get_error(), text.data(), text.size());
+    ERR_clear_error();
+    return {EX_SOFTWARE, foundation::format("cannot %@: %@", action, std::string_view(text.data()))};
+}
+
+/// Holds a library call to its success value.
+inline void require(bool succeeded, std::string_view action) {
+    if (!succeeded) throw openSSLFailure(action);
+}
+
+}  // namespace pinwell::lumora

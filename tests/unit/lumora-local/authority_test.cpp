@@ -1,0 +1,164 @@
+#include "lumora-local/authority.h"
+
+#include <gtest/gtest.h>
+
+#include <set>
+
+#include "certificates.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using test::carries;
+using test::certificateFromPem;
+using test::keyFromPem;
+
+constexpr foundation::Date kNow{1'795'000'000};
+constexpr std::int64_t kDay = 86'400;
+
+class AuthorityTest : public testing::Test {
+  protected:
+    const Authority authority_ = createAuthority({"tickets.example", "127.0.0.1", "::1"}, kNow);
+    const test::Certificate root_ = certificateFromPem(authority_.root.certificate);
+    const test::Certificate intermediate_ = certificateFromPem(authority_.ticketIntermediate.certificate);
+    const test::Certificate signer_ = certificateFromPem(authority_.ticketSigner.certificate);
+    const test::Certificate server_ = certificateFromPem(authority_.server.certificate);
+    const std::vector<X509*> all_{root_.get(), intermediate_.get(), signer_.get(), server_.get()};
+};
+
+/// The library's own judgement of a chain, without purposes: those are asked for apart.
+int verify(X509* leaf, X509* intermediate, X509* root, std::int64_t at) {
+    X509_STORE* store = X509_STORE_new();
+    X509_STORE_add_cert(store, root);
+    STACK_OF(X509)* others = sk_X509_new_null();
+    if (intermediate != nullptr) sk_X509_push(others, intermediate);
+    X509_STORE_CTX* context = X509_STORE_CTX_new();
+    X509_STORE_CTX_init(context, store, leaf, others);
+    X509_VERIFY_PARAM_set_time(X509_STORE_CTX_get0_param(context), static_cast<time_t>(at));
+    X509_VERIFY_PARAM_set_flags(X509_STORE_CTX_get0_param(context),
+                                X509_V_FLAG_X509_STRICT | X509_V_FLAG_CHECK_SS_SIGNATURE);
+    X509_verify_cert(context);
+    const int error = X509_STORE_CTX_get_error(context);
+    X509_STORE_CTX_free(context);
+    sk_X509_free(others);
+    X509_STORE_free(store);
+    return error;
+}
+
+TEST_F(AuthorityTest, ChainsTheTicketSignerToTheRootThroughTheIntermediate) {
+    EXPECT_EQ(verify(signer_.get(), intermediate_.get(), root_.get(), kNow.seconds), X509_V_OK);
+    EXPECT_NE(verify(signer_.get(), nullptr, root_.get(), kNow.seconds), X509_V_OK);
+}
+
+TEST_F(AuthorityTest, ChainsTheServerToTheRoot) {
+    EXPECT_EQ(verify(server_.get(), nullptr, root_.get(), kNow.seconds), X509_V_OK);
+}
+
+TEST_F(AuthorityTest, IsValidFromADayBeforeForTenYears) {
+    EXPECT_EQ(verify(server_.get(), nullptr, root_.get(), kNow.seconds - kDay + 60), X509_V_OK);
+    EXPECT_EQ(verify(server_.get(), nullptr, root_.get(), kNow.seconds + 3650 * kDay), X509_V_OK);
+    EXPECT_NE(verify(server_.get(), nullptr, root_.get(), kNow.seconds - 2 * kDay), X509_V_OK);
+    EXPECT_NE(verify(server_.get(), nullptr, root_.get(), kNow.seconds + 3660 * kDay), X509_V_OK);
+}
+
+TEST_F(AuthorityTest, MarksEachCertificateForItsUseAndNoOther) {
+    const std::vector<std::pair<X509*, std::string_view>> marked{
+        {intermediate_.get(), kTicketIntermediateMarkerOid},
+        {signer_.get(), kTicketSignerMarkerOid},
+        {server_.get(), kServerMarkerOid}};
+    for (X509* certificate : all_) {
+        for (const auto& [bearer, oid] : marked) {
+            EXPECT_EQ(carries(certificate, std::string(oid)), certificate == bearer) << oid;
+        }
+    }
+}
+
+TEST_F(AuthorityTest, LeavesNoCriticalExtensionThatAVerifierMightNotKnow) {
+    for (X509* certificate : all_) {
+        for (int i = 0; i < X509_get_ext_count(certificate); ++i) {
+            X509_EXTENSION* extension = X509_get_ext(certificate, i);
+            const int identifier = OBJ_obj2nid(X509_EXTENSION_get_object(extension));
+            if (X509_EXTENSION_get_critical(extension) != 0) {
+                EXPECT_TRUE(identifier == NID_basic_constraints || identifier == NID_key_usage);
+            }
+        }
+    }
+}
+
+TEST_F(AuthorityTest, UsesP256KeysAndSha256) {
+    for (X509* certificate : all_) {
+        EXPECT_EQ(EVP_PKEY_get_base_id(X509_get0_pubkey(certificate)), EVP_PKEY_EC);
+        EXPECT_EQ(EVP_PKEY_get_bits(X509_get0_pubkey(certificate)), 256);
+        EXPECT_EQ(X509_get_signature_nid(certificate), NID_ecdsa_with_SHA256);
+    }
+}
+
+TEST_F(AuthorityTest, HandsOutTheKeyOfEachCertificate) {
+    for (const Identity* identity :
+         {&authority_.root, &authority_.ticketIntermediate, &authority_.ticketSigner, &authority_.server}) {
+        const test::Key key = keyFromPem(identity->privateKey);
+        EXPECT_EQ(X509_check_private_key(certificateFromPem(identity->certificate).get(), key.get()), 1);
+    }
+}
+
+TEST_F(AuthorityTest, LinksEveryCertificateToItsIssuersKey) {
+    for (X509* certificate : all_) {
+        X509* issuer = certificate == signer_.get() ? intermediate_.get() : root_.get();
+        const ASN1_OCTET_STRING* wanted = X509_get0_subject_key_id(issuer);
+        const ASN1_OCTET_STRING* found = X509_get0_authority_key_id(certificate);
+        ASSERT_NE(wanted, nullptr);
+        ASSERT_NE(found, nullptr);
+        EXPECT_EQ(ASN1_OCTET_STRING_cmp(wanted, found), 0);
+    }
+}
+
+TEST_F(AuthorityTest, LetsOnlyTheTwoAuthoritiesIssue) {
+    EXPECT_EQ(X509_check_ca(root_.get()), 1);
+    EXPECT_EQ(X509_check_ca(intermediate_.get()), 1);
+    EXPECT_EQ(X509_check_ca(signer_.get()), 0);
+    EXPECT_EQ(X509_check_ca(server_.get()), 0);
+    EXPECT_EQ(X509_get_pathlen(intermediate_.get()), 0);
+    EXPECT_EQ(X509_get_key_usage(signer_.get()), std::uint32_t{KU_DIGITAL_SIGNATURE});
+    EXPECT_EQ(X509_get_key_usage(server_.get()), std::uint32_t{KU_DIGITAL_SIGNATURE});
+    EXPECT_EQ(X509_get_key_usage(root_.get()), std::uint32_t{KU_KEY_CERT_SIGN | KU_CRL_SIGN});
+    EXPECT_EQ(X509_get_extended_key_usage(server_.get()), std::uint32_t{XKU_SSL_SERVER});
+}
+
+TEST_F(AuthorityTest, NamesEverySubjectAndNumbersEveryCertificate) {
+    std::set<std::string> serialNumbers;
+    for (X509* certificate : all_) {
+        EXPECT_GT(X509_NAME_entry_count(X509_get_subject_name(certificate)), 0);
+        const ASN1_INTEGER* number = X509_get0_serialNumber(certificate);
+        EXPECT_LE(number->length, 20);
+        EXPECT_EQ(number->type, V_ASN1_INTEGER);  // not V_ASN1_NEG_INTEGER
+        serialNumbers.insert(std::string(number->data, number->data + number->length));
+    }
+    EXPECT_EQ(serialNumbers.size(), all_.size());
+}
+
+TEST_F(AuthorityTest, LetsTheServerSpeakForItsHostsAlone) {
+    EXPECT_EQ(
+        X509_check_host(server_.get(), "tickets.example", 0, X509_CHECK_FLAG_NEVER_CHECK_SUBJECT, nullptr),
+        1);
+    EXPECT_EQ(X509_check_ip_asc(server_.get(), "127.0.0.1", 0), 1);
+    EXPECT_EQ(X509_check_ip_asc(server_.get(), "::1", 0), 1);
+    EXPECT_EQ(X509_check_host(server_.get(), "localhost", 0, 0, nullptr), 0);
+    EXPECT_EQ(X509_check_ip_asc(server_.get(), "127.0.0.2", 0), 0);
+}
+
+TEST(Authority, CopesWithTheLongestHostName) {
+    std::string longest;
+    for (int i = 0; i < 126; ++i) longest += "a.";
+    longest += "a";
+    const Authority authority = createAuthority({longest}, kNow);
+    const test::Certificate server = certificateFromPem(authority.server.certificate);
+    EXPECT_EQ(X509_check_host(server.get(), longest.c_str(), longest.size(), 0, nullptr), 1);
+}
+
+TEST(Authority, IsNeverTheSameTwice) {
+    const std::vector<std::string> hosts{"localhost"};
+    EXPECT_NE(createAuthority(hosts, kNow).root.privateKey, createAuthority(hosts, kNow).root.privateKey);
+}
+
+}  // namespace
+}  // namespace pinwell::lumora
