@@ -1,0 +1,67 @@
+// Making signed tickets.
+//
+// Container (all integers little-endian; the signature covers everything before it):
+//
+//   offset  size  field
+//   0       4     magic "s8ch"
+//   4       2     version 1
+//   6       2     reserved, 0
+//   8       4     A, length of the certificate block
+//   12      4     B, length of the payload
+//   16      A     DER SEQUENCE of the signer's certificate, its issuer's and the root's
+//   16+A    B     payload
+//   16+A+B  72    ECDSA signature over SHA-256, DER (X9.62), left-aligned, zero bytes behind it
+//
+// Payload:
+//
+//   0       4     magic "m8tk"
+//   4       2     version: 2; 1 for a ticket over a hash of unknown digest type
+//   6       2     hash length: 48 when a listed hash has 48 bytes, else 20
+//   8       4     number of entries
+//   12      4     flags: bit 0 revoked
+//   16      8     signature time, seconds since 1970-01-01 UTC
+//   24      ...   entries: (version 2: one byte digest type,) the hash, zero bytes up to the hash length
+#pragma once
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "foundation/bytes.h"
+#include "foundation/date.h"
+#include "lumora-local/code_hash.h"
+
+struct evp_pkey_st;
+
+namespace pinwell::lumora {
+
+/// What readers of tickets accept at most.
+inline constexpr std::size_t kMaximumPayloadSize = 16 * 1024 * 1024;
+inline constexpr std::size_t kSignatureFieldSize = 72;
+
+struct TicketContents {
+    std::vector<CodeHash> hashes;  // the artefact's own first
+    bool revoked = false;
+    foundation::Date signedAt;
+};
+
+/// The payload alone. Throws Failure (EX_DATAERR) for a hash whose length is not its digest type's, for a
+/// digest type that no ticket can carry, and for more hashes than fit the maximum.
+foundation::Data encodeTicketPayload(const TicketContents& contents);
+
+/// Signs with one key. Immutable after construction; may be used from any thread.
+class TicketSigner {
+  public:
+    /// PEM files: the signer's key, and its chain with the signer first. Throws Failure when one cannot be
+    /// used or the key is not the first certificate's.
+    TicketSigner(const std::string& keyPath, const std::vector<std::string>& chainPaths);
+
+    /// A complete container. Throws Failure as encodeTicketPayload does.
+    foundation::Data makeTicket(const TicketContents& contents) const;
+
+  private:
+    std::shared_ptr<evp_pkey_st> key_;
+    foundation::Data certificateBlock_;
+};
+
+}  // namespace pinwell::lumora
