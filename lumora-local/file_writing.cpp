@@ -1,0 +1,114 @@
+#include "lumora-local/file_writing.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <filesystem>
+#include <system_error>
+
+#include "foundation/file_io.h"
+#include "foundation/format.h"
+#include "foundation/process.h"
+#include "lumora-local/failure.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::ByteView;
+using foundation::FileDescriptor;
+using foundation::format;
+
+Failure failureFromErrno(int exitStatus, std::string_view action, const std::string& path) {
+    const std::string reason = std::generic_category().message(errno);
+    return {exitStatus, format("cannot %@ %@: %@", action, path, reason)};
+}
+
+void writeAll(int descriptor, ByteView contents, const std::string& path) {
+    while (!contents.empty()) {
+        const ssize_t written = ::write(descriptor, contents.data(), contents.size());
+        if (written < 0 && errno == EINTR) continue;
+        if (written < 0) throw failureFromErrno(EX_IOERR, "write", path);
+        contents = contents.subspan(static_cast<std::size_t>(written));
+    }
+    if (::fsync(descriptor) != 0) throw failureFromErrno(EX_IOERR, "flush", path);
+}
+
+std::string parentOf(const std::string& path) {
+    const std::filesystem::path parent = std::filesystem::path(path).parent_path();
+    return parent.empty() ? "." : parent.string();
+}
+
+std::string withoutTrailingSlashes(std::string path) {
+    while (path.size() > 1 && path.back() == '/') path.pop_back();
+    return path;
+}
+
+}  // namespace
+
+void writeNewFile(const std::string& path, ByteView contents, mode_t mode) {
+    const FileDescriptor file(
+        ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, mode));
+    if (!file) throw failureFromErrno(EX_CANTCREAT, "create", path);
+    writeAll(file.get(), contents, path);
+}
+
+void replaceFile(const std::string& path, ByteView contents, mode_t mode) {
+    const std::string temporary = temporarySiblingOf(path);
+    try {
+        writeNewFile(temporary, contents, mode);
+        if (std::rename(temporary.c_str(), path.c_str()) != 0) {
+            throw failureFromErrno(EX_CANTCREAT, "replace", path);
+        }
+    } catch (const Failure&) {
+        ::unlink(temporary.c_str());
+        throw;
+    }
+    flushDirectory(parentOf(path));
+}
+
+void makeDirectory(const std::string& path, mode_t mode) {
+    if (::mkdir(path.c_str(), mode) != 0) throw failureFromErrno(EX_CANTCREAT, "create", path);
+}
+
+void flushDirectory(const std::string& path) {
+    const FileDescriptor directory(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (!directory) throw failureFromErrno(EX_IOERR, "open", path);
+    // Some file systems have nothing to flush for a directory and say so.
+    if (::fsync(directory.get()) != 0 && errno != EINVAL) throw failureFromErrno(EX_IOERR, "flush", path);
+}
+
+std::string temporarySiblingOf(const std::string& path) {
+    const std::filesystem::path file(path);
+    const std::string name = "." + file.filename().string() + "." + foundation::globallyUniqueString();
+    return (file.parent_path() / name).string();
+}
+
+PendingDirectory::PendingDirectory(std::string finalPath, mode_t mode)
+    : finalPath_(withoutTrailingSlashes(std::move(finalPath))), path_(temporarySiblingOf(finalPath_)) {
+    // The rename at the end decides; this only spares the work, and names the cause.
+    std::error_code error;
+    const std::filesystem::file_status status = std::filesystem::symlink_status(finalPath_, error);
+    const bool vacant = status.type() == std::filesystem::file_type::not_found ||
+                        (status.type() == std::filesystem::file_type::directory &&
+                         std::filesystem::is_empty(finalPath_, error) && !error);
+    if (!vacant) throw Failure(EX_CANTCREAT, format("%@ exists already and is left as it is", finalPath_));
+    makeDirectory(path_, mode);
+}
+
+PendingDirectory::~PendingDirectory() {
+    std::error_code ignored;
+    if (!published_) std::filesystem::remove_all(path_, ignored);
+}
+
+void PendingDirectory::publish() {
+    if (std::rename(path_.c_str(), finalPath_.c_str()) != 0) {
+        throw failureFromErrno(EX_CANTCREAT, "create", finalPath_);
+    }
+    published_ = true;
+    flushDirectory(parentOf(finalPath_));
+}
+
+}  // namespace pinwell::lumora

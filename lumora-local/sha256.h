@@ -1,0 +1,11 @@
+// SHA-256 (FIPS 180-4).
+#pragma once
+
+#include "foundation/bytes.h"
+
+namespace pinwell::lumora {
+
+/// 32 bytes. Throws Failure when the cryptographic library fails.
+foundation::Data sha256(foundation::ByteView bytes);
+
+}  // namespace pinwell::lumora
