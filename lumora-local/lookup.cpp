@@ -1,0 +1,207 @@
+#include "lumora-local/lookup.h"
+
+#include <algorithm>
+#include <exception>
+
+#include "foundation/base64.h"
+#include "foundation/format.h"
+#include "foundation/json.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::Array;
+using foundation::Data;
+using foundation::Dictionary;
+using foundation::format;
+using foundation::Value;
+
+constexpr std::string_view kDatabasePrefix = "/database/1/";
+constexpr std::string_view kLookupSuffix = "/public/records/lookup";
+constexpr std::string_view kAssetPrefix = "/assets/";
+constexpr std::string_view kHealthPath = "/healthz";
+constexpr std::string_view kFileNameToken = "${f}";
+constexpr std::size_t kAssetIdentifierLength = 64;  // SHA-256 in hexadecimal
+constexpr std::size_t kMaximumFileNameLength = 200;
+
+std::string_view pathOf(std::string_view target) {
+    return target.substr(0, target.find_first_of("?#"));
+}
+
+std::string json(const Value& value) {
+    const foundation::Result<Data> document = foundation::serializeJSON(value);
+    // What is said here is text of our own or text that came out of a JSON parser.
+    return document ? foundation::toString(*document) : std::string("{}");
+}
+
+Answer notFound() {
+    return refusal(404, "NOT_FOUND", "There is nothing at this path");
+}
+
+Answer methodNotAllowed(const char* allowed) {
+    Answer answer = refusal(405, "METHOD_NOT_ALLOWED", format("The method here is %s", allowed));
+    answer.headers.emplace_back("Allow", allowed);
+    return answer;
+}
+
+/// Case and parameters of the media type do not count (RFC 9110, 8.3.1).
+bool isJson(std::string_view contentType) {
+    std::string_view type = contentType.substr(0, contentType.find(';'));
+    while (!type.empty() && (type.back() == ' ' || type.back() == '\t')) type.remove_suffix(1);
+    constexpr std::string_view kWanted = "application/json";
+    return std::equal(type.begin(), type.end(), kWanted.begin(), kWanted.end(), [](char given, char wanted) {
+        return given == wanted || (given >= 'A' && given <= 'Z' && given - 'A' + 'a' == wanted);
+    });
+}
+
+/// Between the prefix and the suffix stand the container and the environment.
+std::optional<Environment> environmentOfLookup(std::string_view path) {
+    if (!path.starts_with(kDatabasePrefix)) return std::nullopt;
+    path.remove_prefix(kDatabasePrefix.size());
+    if (!path.ends_with(kLookupSuffix)) return std::nullopt;
+    path.remove_suffix(kLookupSuffix.size());
+    if (!path.starts_with(kContainer)) return std::nullopt;
+    path.remove_prefix(kContainer.size());
+    if (!path.starts_with('/')) return std::nullopt;
+    return parseEnvironment(path.substr(1));
+}
+
+bool isFileNameCharacter(char c) {
+    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '.' ||
+           c == '_' || c == '-';
+}
+
+/// The identifier in "/assets/IDENTIFIER/NAME". A name that still is the token, or anything but a plain file
+/// name, is refused: it means that the client did not fill in the template.
+std::optional<std::string> assetIdentifier(std::string_view path) {
+    path.remove_prefix(kAssetPrefix.size());
+    const std::size_t slash = path.find('/');
+    if (slash != kAssetIdentifierLength) return std::nullopt;
+    const std::string_view name = path.substr(slash + 1);
+    if (name.empty() || name.size() > kMaximumFileNameLength ||
+        !std::all_of(name.begin(), name.end(), isFileNameCharacter)) {
+        return std::nullopt;
+    }
+    return std::string(path.substr(0, slash));
+}
+
+/// The names asked for, or why they cannot be had.
+struct LookupBody {
+    std::vector<std::string> names;
+    std::optional<Answer> refused;
+};
+
+LookupBody badRequest(std::string_view reason) {
+    return {{}, refusal(400, "BAD_REQUEST", reason)};
+}
+
+LookupBody parseLookupBody(std::string_view body) {
+    const foundation::Result<Value> document = foundation::parseJSON(foundation::asBytes(body));
+    if (!document) {
+        return badRequest(format("The body is not JSON: %@", document.error().localizedDescription()));
+    }
+    if (document->dictionary() == nullptr) return badRequest("The body is not a JSON object");
+    const Array* records = (*document)["records"].array();
+    if (records == nullptr) return badRequest("\"records\" is not an array");
+    if (records->empty()) return badRequest("\"records\" is empty");
+    if (records->size() > kMaximumRecordsPerRequest) {
+        return badRequest(format("At most %zu records can be looked up at once", kMaximumRecordsPerRequest));
+    }
+    LookupBody parsed;
+    for (const Value& record : *records) {
+        if (record.dictionary() == nullptr) return badRequest("A record is not a JSON object");
+        const std::string* name = record["recordName"].string();
+        if (name == nullptr) return badRequest("\"recordName\" is not a string");
+        if (name->size() > kMaximumRecordNameLength) {
+            return badRequest(format("A record name has at most %zu bytes", kMaximumRecordNameLength));
+        }
+        parsed.names.push_back(*name);
+    }
+    return parsed;
+}
+
+Value missingRecord(const std::string& name) {
+    return Dictionary{{"recordName", name}, {"serverErrorCode", "NOT_FOUND"}, {"reason", "Record not found"}};
+}
+
+Value foundRecord(const std::string& name, std::string field, const char* type, Value value) {
+    Dictionary fields{{std::move(field), Dictionary{{"type", type}, {"value", std::move(value)}}}};
+    return Dictionary{{"recordName", name}, {"recordType", "SignedTicket"}, {"fields", std::move(fields)}};
+}
+
+}  // namespace
+
+Answer refusal(int status, std::string_view code, std::string_view reason) {
+    Answer answer;
+    answer.status = status;
+    answer.body = json(Dictionary{{"serverErrorCode", code}, {"reason", reason}});
+    return answer;
+}
+
+std::optional<Answer> LookupService::answerHead(const RequestHead& head) const {
+    const std::string_view path = pathOf(head.target);
+    const bool reading = head.method == "GET" || head.method == "HEAD";
+    if (path == kHealthPath) return reading ? answerHealth() : methodNotAllowed("GET");
+    if (path.starts_with(kAssetPrefix)) return reading ? answerAsset(path) : methodNotAllowed("GET");
+    if (!environmentOfLookup(path)) return notFound();
+    if (head.method != "POST") return methodNotAllowed("POST");
+    if (!isJson(head.contentType)) {
+        return refusal(415, "UNSUPPORTED_MEDIA_TYPE", "The content type of a lookup is application/json");
+    }
+    if (!head.contentEncoding.empty() && head.contentEncoding != "identity") {
+        return refusal(415, "UNSUPPORTED_MEDIA_TYPE", "A lookup is sent without a content encoding");
+    }
+    return std::nullopt;
+}
+
+Answer LookupService::answerLookup(const RequestHead& head, std::string_view body) const {
+    const std::optional<Environment> environment = environmentOfLookup(pathOf(head.target));
+    if (!environment) return notFound();
+    LookupBody request = parseLookupBody(body);
+    if (request.refused) return *std::move(request.refused);
+    Array records;
+    for (const std::string& name : request.names) {
+        const std::optional<Delivery> delivery = source_.findTicket(*environment, name);
+        if (delivery && delivery->inlineTicket) {
+            records.push_back(foundRecord(name, "signedTicket", "BYTES",
+                                          foundation::encodeBase64(*delivery->inlineTicket)));
+        } else if (delivery && delivery->asset) {
+            Dictionary asset{{"downloadURL", assetUrlTemplate(head, delivery->asset->identifier)},
+                             {"size", delivery->asset->size}};
+            records.push_back(foundRecord(name, "signedTicketAsset", "ASSET", std::move(asset)));
+        } else {
+            records.push_back(missingRecord(name));
+        }
+    }
+    Answer answer;
+    answer.body = json(Dictionary{{"records", std::move(records)}});
+    return answer;
+}
+
+Answer LookupService::answerAsset(std::string_view path) const {
+    const std::optional<std::string> identifier = assetIdentifier(path);
+    const std::optional<Data> ticket = identifier ? source_.findAsset(*identifier) : std::nullopt;
+    if (!ticket) return notFound();
+    Answer answer;
+    answer.contentType = "application/octet-stream";
+    answer.body = foundation::toString(*ticket);
+    return answer;
+}
+
+Answer LookupService::answerHealth() const {
+    const std::size_t records = source_.countRecords();
+    Answer answer;
+    answer.body = json(Dictionary{{"status", "ok"}, {"records", std::uint64_t{records}}});
+    return answer;
+}
+
+std::string LookupService::assetUrlTemplate(const RequestHead& head, const std::string& identifier) const {
+    // A client that came by one of our names can come again by it; any other text is not repeated.
+    const std::optional<Endpoint> asked = parseEndpoint(head.host, kHttpsPort);
+    const bool ours =
+        asked && asked->port != 0 && std::find(hosts_.begin(), hosts_.end(), asked->host) != hosts_.end();
+    return "https://" + toString(ours ? *asked : fallback_) + std::string(kAssetPrefix) + identifier + "/" +
+           std::string(kFileNameToken);
+}
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,76 @@
+// The service's protocol, request to answer, without a socket in sight.
+//
+//   POST /database/1/CONTAINER/ENVIRONMENT/public/records/lookup    application/json
+//        {"records": [{"recordName": "2/2/..."}, ...]}
+//     -> {"records": [RECORD, ...]}, in the order asked for; a RECORD is one of
+//        {"recordName": N, "fields": {"signedTicket": {"type": "BYTES", "value": BASE64}}}
+//        {"recordName": N, "fields": {"signedTicketAsset": {"type": "ASSET",
+//                                     "value": {"downloadURL": "https://.../${f}", "size": BYTES}}}}
+//        {"recordName": N, "serverErrorCode": "NOT_FOUND", "reason": "Record not found"}
+//   GET  /assets/IDENTIFIER/NAME    the ticket's bytes; NAME is the client's choice in the place of ${f}
+//   GET  /healthz                   {"status": "ok"}
+//
+// Every refusal is a JSON object {"serverErrorCode": C, "reason": R} with a 4xx or 5xx status.
+#pragma once
+
+#include <optional>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "lumora-local/endpoint.h"
+#include "lumora-local/record_store.h"
+
+namespace pinwell::lumora {
+
+inline constexpr std::string_view kContainer = "com.ostrel.tm.ticket-delivery";
+inline constexpr std::size_t kMaximumBodySize = 1024 * 1024;
+inline constexpr std::size_t kMaximumRecordsPerRequest = 200;
+inline constexpr std::size_t kMaximumRecordNameLength = 255;
+
+/// A request up to its body. `target` is as it stood in the request line; header values are empty when
+/// absent.
+struct RequestHead {
+    std::string method;
+    std::string target;
+    std::string host;
+    std::string contentType;
+    std::string contentEncoding;
+};
+
+struct Answer {
+    int status = 200;
+    std::string contentType = "application/json";
+    std::string body;
+    std::vector<std::pair<std::string, std::string>> headers;
+};
+
+/// A refusal in the form that all refusals have.
+Answer refusal(int status, std::string_view code, std::string_view reason);
+
+class LookupService {
+  public:
+    /// `hosts` are the names that the server's certificate speaks for; `fallback` is where the service can be
+    /// reached when a request does not say by which of them it came.
+    LookupService(RecordSource& source, std::vector<std::string> hosts, Endpoint fallback)
+        : source_(source), hosts_(std::move(hosts)), fallback_(std::move(fallback)) {}
+
+    /// The answer as far as the head decides it; nothing when the body must be read and handed to
+    /// answerLookup. From any thread.
+    std::optional<Answer> answerHead(const RequestHead& head) const;
+
+    /// The answer to a lookup whose head was accepted. From any thread.
+    Answer answerLookup(const RequestHead& head, std::string_view body) const;
+
+  private:
+    Answer answerAsset(std::string_view path) const;
+    Answer answerHealth() const;
+    std::string assetUrlTemplate(const RequestHead& head, const std::string& identifier) const;
+
+    RecordSource& source_;
+    std::vector<std::string> hosts_;
+    Endpoint fallback_;
+};
+
+}  // namespace pinwell::lumora
