@@ -1,0 +1,108 @@
+#include "lumora-local/commands.h"
+
+#include <filesystem>
+#include <system_error>
+
+#include "foundation/format.h"
+#include "foundation/json.h"
+#include "lumora-local/failure.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::Array;
+using foundation::Data;
+using foundation::Dictionary;
+using foundation::format;
+using foundation::Value;
+
+SignedRecord signRecord(const Registry& registry, Record record) {
+    record.signedAt = registry.now();
+    Data ticket = registry.signer.makeTicket({record.hashes, record.revoked, record.signedAt});
+    if (ticket.size() > kMaximumInlineTicketSize) record.asAsset = true;
+    return {std::move(record), std::move(ticket)};
+}
+
+std::vector<Record> putAll(const Registry& registry, const std::vector<Record>& records) {
+    std::vector<SignedRecord> signedRecords;
+    std::vector<Record> answer;
+    for (const Record& record : records) {
+        signedRecords.push_back(signRecord(registry, record));
+        answer.push_back(signedRecords.back().record);
+    }
+    registry.store.put(registry.environment, signedRecords);
+    return answer;
+}
+
+/// A record's name has the shape of a relative path, and a file may have that name: the record goes first.
+Record recordOf(const Registry& registry, const std::string& subject) {
+    if (parseRecordName(subject)) {
+        if (const auto record = registry.store.find(registry.environment, subject)) return *record;
+        std::error_code ignored;
+        if (!std::filesystem::exists(subject, ignored)) {
+            throw Failure(EX_DATAERR, format("there is no record %@", subject));
+        }
+    }
+    const std::string name = recordName(registry.hasher.examine(subject).own);
+    const auto record = registry.store.find(registry.environment, name);
+    if (!record) throw Failure(EX_DATAERR, format("there is no record for %@ (%@)", subject, name));
+    return *record;
+}
+
+Value asValue(const Record& record) {
+    Array hashes;
+    for (const CodeHash& hash : record.hashes) {
+        hashes.push_back(Dictionary{{"algorithm", hash.algorithm}, {"hash", foundation::toHex(hash.hash)}});
+    }
+    return Dictionary{{"recordName", record.name},
+                      {"label", foundation::escapeForTerminal(record.label)},
+                      {"revoked", record.revoked},
+                      {"asset", record.asAsset},
+                      {"signatureTime", record.signedAt.seconds},
+                      {"hashes", std::move(hashes)}};
+}
+
+}  // namespace
+
+std::vector<Record> issue(const Registry& registry, const std::vector<std::string>& paths, bool asAsset) {
+    std::vector<Record> records;
+    for (const std::string& path : paths) {
+        Artefact artefact = registry.hasher.examine(path);
+        Record record;
+        record.name = recordName(artefact.own);
+        record.label = std::move(artefact.label);
+        record.hashes = std::move(artefact.hashes);
+        record.asAsset = asAsset;
+        records.push_back(std::move(record));
+    }
+    return putAll(registry, records);
+}
+
+std::vector<Record> revoke(const Registry& registry, const std::vector<std::string>& subjects) {
+    std::vector<Record> records;
+    for (const std::string& subject : subjects) {
+        records.push_back(recordOf(registry, subject));
+        records.back().revoked = true;
+    }
+    return putAll(registry, records);
+}
+
+std::string describeRecords(const std::vector<Record>& records) {
+    std::string text;
+    for (const Record& record : records) {
+        text +=
+            format("%s\t%@\t%s\t%@\t%zu\t%@\n", record.revoked ? "revoked" : "valid", record.name,
+                   record.asAsset ? "asset" : "inline", record.signedAt, record.hashes.size(), record.label);
+    }
+    return text;
+}
+
+std::string recordsAsJson(const std::vector<Record>& records) {
+    Array values;
+    for (const Record& record : records) values.push_back(asValue(record));
+    const auto document = foundation::serializeJSON(Dictionary{{"records", std::move(values)}});
+    if (!document) throw Failure(EX_SOFTWARE, document.error().localizedDescription());
+    return foundation::toString(*document) + "\n";
+}
+
+}  // namespace pinwell::lumora

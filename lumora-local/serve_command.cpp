@@ -1,0 +1,75 @@
+#include "lumora-local/serve_command.h"
+
+#include <pthread.h>
+#include <signal.h>
+#include <sys/signalfd.h>
+#include <unistd.h>
+
+#include <algorithm>
+
+#include "foundation/format.h"
+#include "lumora-local/failure.h"
+#include "lumora-local/file_writing.h"
+#include "lumora-local/record_store.h"
+#include "lumora-local/server.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::format;
+
+/// Where a client finds a service that listens at `bound`: an address that stands for all is none to connect
+/// to.
+Endpoint reachable(const ServiceDirectory& directory, const Endpoint& bound) {
+    return isWildcard(bound.host) ? Endpoint{directory.hosts().front(), bound.port} : bound;
+}
+
+void announce(const ServiceDirectory& directory, const ServeOptions& options, const ServeOutput& output,
+              const Endpoint& endpoint) {
+    const auto& hosts = directory.hosts();
+    if (std::find(hosts.begin(), hosts.end(), endpoint.host) == hosts.end()) {
+        output.err(format("the service's certificate does not speak for %@: clients will refuse it there",
+                          endpoint.host));
+    }
+    if (options.updatePlatform) directory.advertise(endpoint);
+    const Endpoint advertised = directory.advertisedEndpoint();
+    const std::string url = "https://" + toString(endpoint);
+    output.out(format("ready at %@", url));
+    if (!(advertised == endpoint)) {
+        output.out(
+            format("%@/platform.json sends clients to %@; with --update-platform it names this service",
+                   directory.platformPath(), toString(advertised)));
+    }
+    if (options.readyFile) replaceFile(*options.readyFile, foundation::asBytes(url + "\n"), 0644);
+}
+
+}  // namespace
+
+foundation::FileDescriptor stopOnSignals() {
+    sigset_t signals;
+    sigemptyset(&signals);
+    sigaddset(&signals, SIGTERM);
+    sigaddset(&signals, SIGINT);
+    if (::pthread_sigmask(SIG_BLOCK, &signals, nullptr) != 0) throw Failure(EX_OSERR, "cannot block signals");
+    foundation::FileDescriptor descriptor(::signalfd(-1, &signals, SFD_CLOEXEC | SFD_NONBLOCK));
+    if (!descriptor) throw Failure(EX_OSERR, "cannot wait for signals");
+    return descriptor;
+}
+
+void serve(const ServiceDirectory& directory, const ServeOptions& options, const ServeOutput& output,
+           int stopDescriptor) {
+    // A file that an earlier run left would tell of a service that is not there yet.
+    if (options.readyFile) ::unlink(options.readyFile->c_str());
+    const TlsContext tls(directory.serverCertificatePath(), directory.serverKeyPath());
+    RecordStore store(directory.storePath());
+    Listener listener(options.listen ? *options.listen : directory.advertisedEndpoint());
+    const Endpoint endpoint = reachable(directory, listener.endpoint());
+    announce(directory, options, output, endpoint);
+
+    const LookupService lookups(store, directory.hosts(), endpoint);
+    Server server(lookups, tls, output.out, output.err);
+    server.run(listener, stopDescriptor);
+    output.out("stopped");
+}
+
+}  // namespace pinwell::lumora

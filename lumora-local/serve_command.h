@@ -1,0 +1,37 @@
+// Running the service: where it listens, whom it tells, and how it is stopped.
+#pragma once
+
+#include <functional>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "foundation/file_io.h"
+#include "lumora-local/endpoint.h"
+#include "lumora-local/service_directory.h"
+
+namespace pinwell::lumora {
+
+struct ServeOptions {
+    std::optional<Endpoint> listen;  // where platform.json sends clients, when absent
+    std::optional<std::string>
+        readyFile;                // gets one line, "https://ADDRESS:PORT", once connections are accepted
+    bool updatePlatform = false;  // platform.json is rewritten to where the service really is
+};
+
+/// Takes whole lines, without a newline; from any thread, several at a time.
+struct ServeOutput {
+    std::function<void(std::string_view)> out;  // readiness and the access log
+    std::function<void(std::string_view)> err;  // what went wrong, or will
+};
+
+/// Blocks SIGTERM and SIGINT for the calling thread and the threads it starts from now on; answers a
+/// descriptor that becomes readable when one of them arrives. Call it before any other thread exists. Throws
+/// Failure.
+foundation::FileDescriptor stopOnSignals();
+
+/// Serves until `stopDescriptor` is readable. Throws Failure when it cannot begin.
+void serve(const ServiceDirectory& directory, const ServeOptions& options, const ServeOutput& output,
+           int stopDescriptor);
+
+}  // namespace pinwell::lumora

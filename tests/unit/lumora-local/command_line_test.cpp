@@ -1,0 +1,114 @@
+#include <gtest/gtest.h>
+
+#include <filesystem>
+
+#include "foundation/json.h"
+#include "running_service.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using pinwell::test::readFile;
+using pinwell::test::TemporaryDirectory;
+using pinwell::test::writeFile;
+using test::Outcome;
+using test::runProgram;
+
+/// One line, with the program's name, and nothing on standard output.
+void expectFailure(const Outcome& outcome, int exitStatus) {
+    EXPECT_EQ(outcome.exitStatus, exitStatus) << outcome.err;
+    EXPECT_EQ(outcome.out, "");
+    EXPECT_TRUE(outcome.err.starts_with("lumora-local: ")) << outcome.err;
+    EXPECT_EQ(outcome.err.find('\n'), outcome.err.size() - 1) << outcome.err;
+}
+
+class CommandLine : public testing::Test {
+  protected:
+    const TemporaryDirectory directory_;
+    const std::string service_ = directory_ / "service";
+};
+
+TEST_F(CommandLine, ShowsHelpAndVersion) {
+    EXPECT_EQ(runProgram({"--help"}).exitStatus, 0);
+    EXPECT_NE(runProgram({"--help"}).out.find("issue"), std::string::npos);
+    EXPECT_NE(runProgram({"serve", "--help"}).out.find("--ready-file"), std::string::npos);
+    const Outcome version = runProgram({"--version"});
+    EXPECT_EQ(version.exitStatus, 0);
+    EXPECT_TRUE(version.out.starts_with("lumora-local ")) << version.out;
+}
+
+TEST_F(CommandLine, RefusesWhatItDoesNotUnderstand) {
+    for (const std::vector<std::string>& arguments : {std::vector<std::string>{},
+                                                      {"dance"},
+                                                      {"init"},
+                                                      {"init", service_, "--color"},
+                                                      {"issue", service_},
+                                                      {"init", service_, "--port", "0"},
+                                                      {"init", service_, "--port", "65536"},
+                                                      {"init", service_, "--port", "x"},
+                                                      {"init", service_, "--host", "a b"},
+                                                      {"init", service_, "--host", "0.0.0.0"},
+                                                      {"list", service_, "--environment", "staging"},
+                                                      {"serve", service_, "--listen", "nowhere:x"}}) {
+        expectFailure(runProgram(arguments), 64);
+    }
+    EXPECT_FALSE(std::filesystem::exists(service_));
+}
+
+TEST_F(CommandLine, EscapesWhatItRepeats) {
+    const Outcome outcome = runProgram({"init", service_, "--host", "a\x1b[31m\nb"});
+    expectFailure(outcome, 64);
+    EXPECT_EQ(outcome.err.find('\x1b'), std::string::npos);
+}
+
+TEST_F(CommandLine, MakesAServiceOnce) {
+    const Outcome made =
+        runProgram({"init", service_, "--host", "tickets.example", "--host", "::1", "--port", "99"});
+    EXPECT_EQ(made.exitStatus, 0) << made.err;
+    EXPECT_NE(made.out.find("PINWELL_PLATFORM=" + service_ + "/platform"), std::string::npos) << made.out;
+    EXPECT_EQ(readFile(service_ + "/platform/platform.json"),
+              "{\"lumora\":{\"host\":\"tickets.example:99\"}}\n");
+    expectFailure(runProgram({"init", service_}), 73);
+}
+
+TEST_F(CommandLine, NeedsAServiceToWorkOn) {
+    expectFailure(runProgram({"list", service_}), 66);
+    expectFailure(runProgram({"serve", service_}), 66);
+    expectFailure(runProgram({"issue", service_, "a"}), 66);
+    expectFailure(runProgram({"revoke", service_, "a"}), 66);
+}
+
+TEST_F(CommandLine, SaysWhatCannotBeIssued) {
+    ASSERT_EQ(runProgram({"init", service_}).exitStatus, 0);
+    writeFile(directory_ / "notes.txt", "nothing to sign");
+    expectFailure(runProgram({"issue", service_, directory_ / "missing.app"}), 66);
+    expectFailure(runProgram({"issue", service_, directory_ / "notes.txt"}), 65);
+    EXPECT_EQ(runProgram({"list", service_}).out, "");
+}
+
+TEST_F(CommandLine, TakesANewcomerFromNothingToARevokedTicket) {
+    ASSERT_EQ(runProgram({"init", service_}).exitStatus, 0);
+    const Outcome sample = runProgram({"sample", directory_.path()});
+    ASSERT_EQ(sample.exitStatus, 0) << sample.err;
+    const std::string application = directory_ / "Sample.app";
+    EXPECT_NE(sample.out.find(application + "\n"), std::string::npos) << sample.out;
+
+    const Outcome issued = runProgram({"issue", service_, application});
+    ASSERT_EQ(issued.exitStatus, 0) << issued.err;
+    EXPECT_TRUE(issued.out.starts_with("valid\t2/2/")) << issued.out;
+    EXPECT_TRUE(issued.out.ends_with("\t2\tSample.app\n")) << issued.out;  // both slices
+
+    const Outcome revoked = runProgram({"revoke", service_, application});
+    ASSERT_EQ(revoked.exitStatus, 0) << revoked.err;
+    EXPECT_TRUE(revoked.out.starts_with("revoked\t2/2/")) << revoked.out;
+
+    const Outcome list = runProgram({"list", service_, "--json"});
+    const auto document = foundation::parseJSON(foundation::asBytes(list.out));
+    ASSERT_TRUE(document) << list.out;
+    EXPECT_EQ((*document)["records"].array()->size(), 1U);
+    EXPECT_TRUE((*document)["records"][0]["revoked"].boolValue());
+    expectFailure(runProgram({"sample", directory_.path()}), 73);
+}
+
+}  // namespace
+}  // namespace pinwell::lumora

@@ -1,0 +1,190 @@
+#include "lumora-local/commands.h"
+
+#include <gtest/gtest.h>
+
+#include <map>
+
+#include "foundation/byte_reader.h"
+#include "foundation/json.h"
+#include "lumora-local/failure.h"
+#include "lumora-local/service_directory.h"
+#include "support/temporary_directory.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::ByteReader;
+using foundation::Data;
+using foundation::Date;
+using pinwell::test::TemporaryDirectory;
+
+/// Artefacts by path, without any files.
+class FakeHasher final : public ArtefactHasher {
+  public:
+    Artefact examine(const std::string& path) override {
+        const auto found = artefacts.find(path);
+        if (found == artefacts.end()) throw Failure(EX_NOINPUT, "there is no such file");
+        return found->second;
+    }
+
+    std::map<std::string, Artefact> artefacts;
+};
+
+CodeHash hashOf(std::uint32_t algorithm, int fill) {
+    return {algorithm, Data(*hashLength(algorithm), static_cast<std::byte>(fill))};
+}
+
+Artefact artefact(std::string label, const CodeHash& own, const std::vector<CodeHash>& others = {}) {
+    return {std::move(label), own, hashesForTicket(own, others)};
+}
+
+class CommandsTest : public testing::Test {
+  protected:
+    CommandsTest() {
+        hasher_.artefacts["A.app"] = artefact("A.app", hashOf(2, 0xA1), {hashOf(4, 0xA2), hashOf(2, 0xA1)});
+        hasher_.artefacts["b.dmg"] = artefact("b.dmg", hashOf(2, 0xB1));
+    }
+
+    template <class Work>
+    int exitStatusOf(Work&& work) {
+        try {
+            work();
+        } catch (const Failure& failure) {
+            return failure.exitStatus();
+        }
+        return EX_OK;
+    }
+
+    /// The flags in the ticket that lookups of the record are answered with.
+    std::uint32_t deliveredFlags(const std::string& name) {
+        const auto delivery = store_.findTicket(Environment::production, name);
+        const Data ticket = delivery->inlineTicket ? *delivery->inlineTicket
+                                                   : store_.findAsset(delivery->asset->identifier).value();
+        ByteReader reader(ticket);
+        reader.seek(8, "lengths");
+        const std::uint32_t certificates = reader.le32("certificates");
+        reader.seek(16U + certificates + 12U, "flags");
+        return reader.le32("flags");
+    }
+
+    const TemporaryDirectory directory_;
+    const ServiceDirectory service_ = ServiceDirectory::create(directory_ / "service", {}, Date::now());
+    RecordStore store_{service_.storePath()};
+    const TicketSigner signer_{service_.signerKeyPath(), service_.signerChainPaths()};
+    FakeHasher hasher_;
+    const Registry registry_{store_, signer_, hasher_, Environment::production,
+                             [] { return Date{1'795'000'000}; }};
+    const std::string nameOfA_ = recordName(hashOf(2, 0xA1));
+    const std::string nameOfB_ = recordName(hashOf(2, 0xB1));
+};
+
+TEST_F(CommandsTest, IssuesARecordUnderTheArtefactsOwnHash) {
+    const auto records = issue(registry_, {"A.app"}, false);
+    ASSERT_EQ(records.size(), 1U);
+    EXPECT_EQ(records[0].name, nameOfA_);
+    EXPECT_EQ(records[0].label, "A.app");
+    EXPECT_EQ(records[0].hashes, (std::vector<CodeHash>{hashOf(2, 0xA1), hashOf(4, 0xA2)}));
+    EXPECT_EQ(records[0].signedAt, Date{1'795'000'000});
+    EXPECT_EQ(store_.countRecords(), 1U);
+    EXPECT_EQ(deliveredFlags(nameOfA_), 0U);
+}
+
+TEST_F(CommandsTest, DeliversAsAnAssetOnRequest) {
+    EXPECT_TRUE(issue(registry_, {"A.app"}, true)[0].asAsset);
+    EXPECT_TRUE(store_.findTicket(Environment::production, nameOfA_)->asset);
+}
+
+TEST_F(CommandsTest, DeliversLargeTicketsAsAssetsUnasked) {
+    std::vector<CodeHash> many;
+    for (std::uint32_t i = 0; i < 50'000; ++i) {
+        CodeHash hash = hashOf(2, 0);
+        for (std::size_t byte = 0; byte < 4; ++byte)
+            hash.hash[byte] = static_cast<std::byte>(i >> (8 * byte));
+        many.push_back(hash);
+    }
+    hasher_.artefacts["large"] = {"large", many.front(), many};
+    EXPECT_TRUE(issue(registry_, {"large"}, false)[0].asAsset);
+}
+
+TEST_F(CommandsTest, IssuesAllOrNone) {
+    EXPECT_EQ(exitStatusOf([&] { issue(registry_, {"A.app", "missing"}, false); }), EX_NOINPUT);
+    EXPECT_EQ(store_.countRecords(), 0U);
+}
+
+TEST_F(CommandsTest, IssuesInAnEnvironment) {
+    const Registry development{store_, signer_, hasher_, Environment::development, Date::now};
+    issue(development, {"A.app"}, false);
+    EXPECT_FALSE(store_.find(Environment::production, nameOfA_));
+    EXPECT_TRUE(store_.find(Environment::development, nameOfA_));
+}
+
+TEST_F(CommandsTest, RevokesByNameAndByPath) {
+    issue(registry_, {"A.app", "b.dmg"}, false);
+    const auto records = revoke(registry_, {nameOfA_, "b.dmg"});
+    ASSERT_EQ(records.size(), 2U);
+    EXPECT_TRUE(records[0].revoked && records[1].revoked);
+    EXPECT_EQ(deliveredFlags(nameOfA_), 1U);
+    EXPECT_EQ(deliveredFlags(nameOfB_), 1U);
+}
+
+TEST_F(CommandsTest, KeepsTheDeliveryAndTheHashesOfARevokedRecord) {
+    issue(registry_, {"A.app"}, true);
+    const auto records = revoke(registry_, {nameOfA_});
+    EXPECT_TRUE(records[0].asAsset);
+    EXPECT_EQ(records[0].hashes.size(), 2U);
+    EXPECT_EQ(deliveredFlags(nameOfA_), 1U);
+}
+
+TEST_F(CommandsTest, RevokesAllOrNone) {
+    issue(registry_, {"A.app"}, false);
+    EXPECT_EQ(exitStatusOf([&] { revoke(registry_, {nameOfA_, "b.dmg"}); }), EX_DATAERR);
+    EXPECT_EQ(exitStatusOf([&] { revoke(registry_, {nameOfA_, nameOfB_}); }), EX_DATAERR);
+    EXPECT_EQ(exitStatusOf([&] { revoke(registry_, {nameOfA_, "missing"}); }), EX_NOINPUT);
+    EXPECT_EQ(deliveredFlags(nameOfA_), 0U);
+}
+
+TEST_F(CommandsTest, ReissuesARevokedArtefact) {
+    issue(registry_, {"A.app"}, false);
+    revoke(registry_, {"A.app"});
+    EXPECT_FALSE(issue(registry_, {"A.app"}, false)[0].revoked);
+    EXPECT_EQ(deliveredFlags(nameOfA_), 0U);
+}
+
+TEST_F(CommandsTest, ListsARecordOnALine) {
+    issue(registry_, {"A.app", "b.dmg"}, false);
+    revoke(registry_, {"b.dmg"});
+    EXPECT_EQ(describeRecords(store_.list(Environment::production)),
+              "valid\t" + nameOfA_ + "\tinline\t2026-11-18 11:06:40 +0000\t2\tA.app\n" + "revoked\t" +
+                  nameOfB_ + "\tinline\t2026-11-18 11:06:40 +0000\t1\tb.dmg\n");
+}
+
+TEST_F(CommandsTest, ListsForPrograms) {
+    hasher_.artefacts["odd"] = artefact("odd\n\xFF.app", hashOf(4, 3));
+    issue(registry_, {"odd"}, true);
+    const std::string text = recordsAsJson(store_.list(Environment::production));
+    const auto document = foundation::parseJSON(foundation::asBytes(text));
+    ASSERT_TRUE(document) << text;
+    const auto& record = (*document)["records"][0];
+    EXPECT_EQ(*record["recordName"].string(), recordName(hashOf(4, 3)));
+    EXPECT_FALSE(record["revoked"].boolValue());
+    EXPECT_TRUE(record["asset"].boolValue());
+    EXPECT_EQ(record["signatureTime"].unsignedIntegerValue(), 1'795'000'000U);
+    EXPECT_EQ(record["hashes"][0]["algorithm"].unsignedIntegerValue(), 4U);
+    EXPECT_EQ(record["label"].string()->find('\n'), std::string::npos);
+    EXPECT_EQ(recordsAsJson({}), "{\"records\":[]}\n");
+}
+
+TEST(HashesForTicket, BeginsWithTheOwnHashAndRepeatsNothing) {
+    EXPECT_EQ(hashesForTicket(hashOf(2, 1), {hashOf(4, 2), hashOf(2, 1), hashOf(4, 2), hashOf(1, 1)}),
+              (std::vector<CodeHash>{hashOf(2, 1), hashOf(4, 2), hashOf(1, 1)}));
+}
+
+TEST(HashesForTicket, PassesOverWhatATicketCannotList) {
+    EXPECT_EQ(hashesForTicket(hashOf(2, 1), {{5, Data(20)}, {2, Data(32)}, hashOf(0, 1)}),
+              (std::vector<CodeHash>{hashOf(2, 1)}));
+    EXPECT_EQ(hashesForTicket(hashOf(0, 1), {hashOf(2, 1), hashOf(4, 1)}),
+              (std::vector<CodeHash>{hashOf(0, 1)}));
+}
+
+}  // namespace
+}  // namespace pinwell::lumora

@@ -1,0 +1,90 @@
+// The program under test as a process of its own, and clients that speak to it over TLS.
+#pragma once
+
+#include <sys/types.h>
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "lumora-local/code_hash.h"
+#include "lumora-local/record_store.h"
+#include "lumora-local/service_directory.h"
+#include "support/temporary_directory.h"
+
+namespace httplib {
+class SSLClient;
+}
+
+namespace pinwell::lumora::test {
+
+struct Outcome {
+    int exitStatus = -1;  // 128 and the signal's number when one ended the program
+    std::string out;
+    std::string err;
+};
+
+/// Runs lumora-local to its end.
+Outcome runProgram(const std::vector<std::string>& arguments);
+
+/// A service in a directory of its own, serving on a free loopback port until the test ends.
+class RunningService {
+  public:
+    explicit RunningService(const std::vector<std::string>& options = {});
+    ~RunningService();
+
+    /// A fresh record with a ticket over made-up hashes; answers its name.
+    std::string put(const CodeHash& hash, bool asAsset = false, bool revoked = false);
+
+    int port() const noexcept { return port_; }
+    const std::string& path() const noexcept { return path_; }
+    const ServiceDirectory& directory() const noexcept { return directory_; }
+    std::string rootPath() const { return directory_.platformPath() + "/roots/lumora-local.pem"; }
+
+    /// Trusts the service's root alone, and checks the host.
+    std::unique_ptr<httplib::SSLClient> client() const;
+
+    void sendSignal(int number) const;
+
+    /// Waits for the end. The exit status, or 128 and the signal's number.
+    int wait();
+
+    /// What it has printed so far.
+    std::string output() const;
+    std::string errors() const;
+
+  private:
+    pinwell::test::TemporaryDirectory temporary_;
+    std::string path_ = temporary_ / "service";
+    ServiceDirectory directory_;
+    pid_t process_ = -1;
+    int port_ = 0;
+};
+
+/// A bare TLS connection, for what no well-behaved client would send.
+class RawClient {
+  public:
+    explicit RawClient(const RunningService& service) : RawClient(service.port()) {}
+    explicit RawClient(int port);
+    ~RawClient();
+    RawClient(const RawClient&) = delete;
+    RawClient& operator=(const RawClient&) = delete;
+
+    /// False when the service has closed the connection.
+    bool send(const std::string& bytes);
+
+    /// All that comes until the service closes.
+    std::string readToEnd();
+
+    /// Everything up to the `count`-th empty line: that many heads of answers without bodies, say.
+    std::string readUntil(const std::string& mark, std::size_t count = 1);
+
+    /// Ends the TCP connection without a word of TLS.
+    void drop();
+
+  private:
+    struct Connection;
+    std::unique_ptr<Connection> connection_;
+};
+
+}  // namespace pinwell::lumora::test

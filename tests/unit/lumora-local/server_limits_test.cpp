@@ -1,0 +1,152 @@
+// What the server does when its limits are reached: it runs here, in this process, with limits small enough
+// to reach.
+#include <gtest/gtest.h>
+#include <sys/eventfd.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <mutex>
+#include <stdexcept>
+#include <thread>
+
+#include "lumora-local/server.h"
+#include "running_service.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::Date;
+using foundation::FileDescriptor;
+using pinwell::test::TemporaryDirectory;
+using test::RawClient;
+
+constexpr std::chrono::milliseconds kSoon{50};
+constexpr const char* kHealth = "GET /healthz HTTP/1.1\r\nHost: localhost\r\n\r\n";
+
+/// Records that cannot be read.
+class BrokenRecords final : public RecordSource {
+  public:
+    std::optional<Delivery> findTicket(Environment, const std::string&) override { fail(); }
+    std::optional<foundation::Data> findAsset(const std::string&) override { fail(); }
+    std::size_t countRecords() override { fail(); }
+
+  private:
+    [[noreturn]] static void fail() { throw std::runtime_error("the disk is gone"); }
+};
+
+/// A server over one source of records, until the end of the test.
+class LimitedServer {
+  public:
+    explicit LimitedServer(ServerLimits limits, RecordSource* source = nullptr)
+        : lookups_(source != nullptr ? *source : store_, directory_.hosts(), listener_.endpoint()),
+          server_(
+              lookups_, tls_, [](std::string_view) {},
+              [this](std::string_view line) {
+                  const std::lock_guard lock(mutex_);
+                  errors_ += line;
+              },
+              limits),
+          thread_([this] { server_.run(listener_, stop_.get()); }) {}
+
+    ~LimitedServer() { finish(); }
+
+    void finish() {
+        if (!thread_.joinable()) return;
+        const std::uint64_t one = 1;
+        EXPECT_EQ(::write(stop_.get(), &one, sizeof one), static_cast<ssize_t>(sizeof one));
+        thread_.join();
+    }
+
+    int port() const { return listener_.endpoint().port; }
+
+    std::string errors() {
+        const std::lock_guard lock(mutex_);
+        return errors_;
+    }
+
+  private:
+    TemporaryDirectory temporary_;
+    ServiceDirectory directory_ = ServiceDirectory::create(temporary_ / "service", {}, Date::now());
+    RecordStore store_{directory_.storePath()};
+    TlsContext tls_{directory_.serverCertificatePath(), directory_.serverKeyPath()};
+    Listener listener_{Endpoint{"127.0.0.1", 0}};
+    FileDescriptor stop_{::eventfd(0, EFD_CLOEXEC)};
+    std::mutex mutex_;
+    std::string errors_;
+    LookupService lookups_;
+    Server server_;
+    std::thread thread_;  // last: it uses all of the above
+};
+
+TEST(ServerLimits, EndARequestWhoseHeadTakesTooLong) {
+    LimitedServer server({.requestTime = kSoon});
+    RawClient client(server.port());
+    ASSERT_TRUE(client.send("GET /healthz HTTP/1.1\r\nHost: local"));
+    EXPECT_EQ(client.readToEnd().substr(0, 12), "HTTP/1.1 408");
+}
+
+TEST(ServerLimits, EndARequestWhoseBodyTakesTooLong) {
+    LimitedServer server({.requestTime = kSoon});
+    RawClient client(server.port());
+    ASSERT_TRUE(client.send(
+        "POST /database/1/com.ostrel.tm.ticket-delivery/production/public/records/lookup HTTP/1.1\r\n"
+        "Host: localhost\r\nContent-Type: application/json\r\nContent-Length: 5\r\n\r\n{"));
+    EXPECT_EQ(client.readToEnd().substr(0, 12), "HTTP/1.1 408");
+}
+
+TEST(ServerLimits, EndAConnectionThatStaysIdle) {
+    LimitedServer server({.idleTime = kSoon});
+    RawClient client(server.port());
+    EXPECT_EQ(client.readToEnd(), "");
+}
+
+TEST(ServerLimits, EndAConnectionAfterItsShareOfRequests) {
+    LimitedServer server({.requestsPerConnection = 2});
+    RawClient client(server.port());
+    ASSERT_TRUE(client.send(std::string(kHealth) + kHealth + kHealth));
+    const std::string answers = client.readToEnd();
+    const std::size_t first = answers.find("HTTP/1.1 200");
+    const std::size_t second = answers.find("HTTP/1.1 200", first + 1);
+    ASSERT_NE(second, std::string::npos) << answers;
+    EXPECT_EQ(answers.find("HTTP/1.1 200", second + 1), std::string::npos);
+    EXPECT_EQ(answers.substr(first, second - first).find("Connection: close"), std::string::npos);
+    EXPECT_NE(answers.find("Connection: close", second), std::string::npos);
+}
+
+TEST(ServerLimits, LetFurtherConnectionsWaitTheirTurn) {
+    LimitedServer server({.workers = 1, .connections = 1, .idleTime = kSoon});
+    std::vector<std::thread> clients;
+    std::atomic<int> answered{0};
+    for (int i = 0; i < 4; ++i) {
+        clients.emplace_back([&] {
+            RawClient client(server.port());
+            client.send(kHealth);
+            if (client.readUntil("}").starts_with("HTTP/1.1 200")) ++answered;
+        });
+    }
+    for (std::thread& client : clients) client.join();
+    EXPECT_EQ(answered, 4);
+}
+
+TEST(ServerLimits, DoNotHoldUpTheStop) {
+    LimitedServer server({.idleTime = std::chrono::hours(1)});
+    RawClient idle(server.port());
+    server.finish();
+    EXPECT_EQ(idle.readToEnd(), "");
+}
+
+TEST(Server, SaysThatItsRecordsCannotBeReadAndStaysUp) {
+    BrokenRecords records;
+    LimitedServer server({}, &records);
+    for (int i = 0; i < 2; ++i) {
+        RawClient client(server.port());
+        ASSERT_TRUE(client.send("GET /healthz HTTP/1.1\r\nHost: x\r\nConnection: close\r\n\r\n"));
+        const std::string answer = client.readToEnd();
+        EXPECT_EQ(answer.substr(0, 12), "HTTP/1.1 503");
+        EXPECT_EQ(answer.find("the disk is gone"), std::string::npos);
+        EXPECT_NE(server.errors().find("the disk is gone"), std::string::npos);
+    }
+}
+
+}  // namespace
+}  // namespace pinwell::lumora
