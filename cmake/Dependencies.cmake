@@ -2,7 +2,7 @@
 find_package(Threads REQUIRED)
 find_package(PkgConfig REQUIRED)
 find_package(OpenSSL 3.0 REQUIRED)
-find_package(CURL 7.85 REQUIRED)
+find_package(CURL 7.87 REQUIRED)
 find_package(fmt REQUIRED)
 find_package(nlohmann_json 3.10 REQUIRED)
 pkg_check_modules(GIO REQUIRED IMPORTED_TARGET gio-2.0>=2.66)
