@@ -1,7 +1,6 @@
 #include "lumora-local/lookup.h"
 
 #include <algorithm>
-#include <exception>
 
 #include "foundation/base64.h"
 #include "foundation/format.h"

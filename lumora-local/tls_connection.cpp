@@ -16,7 +16,7 @@ namespace {
 
 using std::chrono::milliseconds;
 
-constexpr milliseconds kFarewellTime{1000};
+constexpr milliseconds kFarewellTime{5000};
 constexpr std::size_t kFarewellBytes = 4 * 1024 * 1024;
 
 /// Waits at most `time` for one of the descriptors; interruptions by signals do not shorten or lengthen it.

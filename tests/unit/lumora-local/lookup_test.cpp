@@ -2,7 +2,6 @@
 
 #include <gtest/gtest.h>
 
-#include <map>
 #include <stdexcept>
 
 #include "foundation/base64.h"

@@ -114,7 +114,7 @@ TEST(ServerLimits, EndAConnectionAfterItsShareOfRequests) {
 }
 
 TEST(ServerLimits, LetFurtherConnectionsWaitTheirTurn) {
-    LimitedServer server({.workers = 1, .connections = 1, .idleTime = kSoon});
+    LimitedServer server({.workers = 1, .connections = 1});
     std::vector<std::thread> clients;
     std::atomic<int> answered{0};
     for (int i = 0; i < 4; ++i) {
