@@ -11,8 +11,8 @@
 #include "foundation/process.h"
 #include "foundation/run_loop.h"
 #include "src/DownloadDelegate.h"
+#include "src/host_platform.h"
 #include "src/messages.h"
-#include "src/type_naming.h"
 
 namespace {
 
@@ -66,18 +66,8 @@ std::uint8_t operationForCommand(std::string_view command) {
 }
 
 int run(const URL& path) {
-    const auto directory = foundation::PlatformDirectory::current();
-    const auto systemLog = syslog::makeSystemLog();
-    const auto types = types::makeTypeService();
-    const auto files = files::makeLocalFileManager(
-        [&types](const files::ItemFacts& facts) { return nameType(*types, facts); });
-    const auto codeSigning = codesign::makeCodeSigningService();
-    const auto trust = trust::makeTrustService(
-        directory, [&systemLog](std::string_view line) { systemLog->error(line); });
-    const auto https = https::makeSessionService(*trust);
-    const auto userDefaults = defaults::makeUserDefaultsService();
-    const Platform platform{*files, *types,        *codeSigning, *trust,   *https,
-                            *userDefaults, *systemLog, directory,    [](int status) { std::exit(status); }};
+    const HostPlatform host([](int status) { std::exit(status); });
+    const Platform platform = host.services();
 
     const auto hashedFile = PWHashedFile::initWithFileURL(path, platform);
     if (hashedFile == nullptr) return kExitNoInput;

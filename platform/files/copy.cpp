@@ -106,4 +106,18 @@ Result<void> copyFile(const std::string& source, const std::string& destination)
     return {};
 }
 
+Result<void> copyFileContents(const std::string& source, const std::string& destination) {
+    const auto from = openRegularFile(source, O_RDONLY);
+    if (!from) return from.error();
+    auto to = createFile(destination, kOrdinaryFile);
+    if (!to) return to.error();
+
+    HalfMadeFile halfMade(destination);
+    if (auto done = copyContents(*from, *to); !done) return done;
+    if (auto done = flush(to->number(), destination); !done) return done;
+    if (auto done = closeReporting(*to); !done) return done;
+    halfMade.keep();
+    return {};
+}
+
 }  // namespace pinwell::files

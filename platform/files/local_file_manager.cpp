@@ -1,6 +1,5 @@
 #include <fcntl.h>
 
-#include <cstdlib>
 #include <utility>
 
 #include "files/bundle_executable.h"
@@ -14,6 +13,7 @@
 #include "files/replacement.h"
 #include "files/trash.h"
 #include "files/whole_file.h"
+#include "foundation/process.h"
 
 namespace pinwell::files {
 namespace {
@@ -64,6 +64,12 @@ class LocalFileManager final : public FileManager {
         });
     }
 
+    Result<void> copyContents(const URL& source, const URL& destination) override {
+        return onPath(source, [&](const std::string& from) {
+            return onPath(destination, [&](const std::string& to) { return copyFileContents(from, to); });
+        });
+    }
+
     Result<void> removeItem(const URL& item) override { return onPath(item, removeTree); }
 
     Result<void> replaceItem(const URL& original, const URL& replacement) override {
@@ -92,8 +98,7 @@ class LocalFileManager final : public FileManager {
     }
 
     URL temporaryDirectory() override {
-        const char* directory = std::getenv("TMPDIR");
-        return URL::fileURLWithPath(directory != nullptr && *directory == '/' ? directory : "/tmp");
+        return foundation::temporaryDirectory();
     }
 
   private:

@@ -55,8 +55,12 @@ int notRegularReason(mode_t mode);
 /// blocks, and never opens a device. `access` is O_RDONLY, O_WRONLY or O_RDWR.
 Result<OpenFile> openRegularFile(const std::string& path, int access);
 
-/// Makes and opens a file of mode 0600, for writing; there must be nothing at `path` yet.
-Result<OpenFile> createFile(const std::string& path);
+/// Modes of a new file: its owner's alone, or what the umask leaves of everybody's.
+inline constexpr mode_t kPrivateFile = S_IRUSR | S_IWUSR;
+inline constexpr mode_t kOrdinaryFile = S_IRUSR | S_IWUSR | S_IRGRP | S_IWGRP | S_IROTH | S_IWOTH;
+
+/// Makes and opens a file for writing; there must be nothing at `path` yet.
+Result<OpenFile> createFile(const std::string& path, mode_t mode = kPrivateFile);
 
 /// Makes and opens a hidden file of mode 0600 and of a name that was free, in `directory`.
 Result<OpenFile> createTemporaryFile(const std::string& directory);

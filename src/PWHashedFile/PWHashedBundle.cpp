@@ -40,13 +40,14 @@ bool PWHashedBundle::writeNewTicketDataFromURL(const URL& source, ErrorOut error
                  foundation::processName(), ticket);
         return fail(std::nullopt);
     }
-    if (!files.copyItem(source, ticket)) {
+    // The bytes alone: the source is a private temporary file, the ticket is read by whoever gets the bundle.
+    if (!files.copyContents(source, ticket)) {
         if (const auto removed = files.removeItem(ticket); !removed) {
             NoisyLog("Could not remove existing ticket from %@ because an error occurred. %@", ticket,
                      removed.error());
             return fail(removed.error());
         }
-        if (const auto copied = files.copyItem(source, ticket); !copied) {
+        if (const auto copied = files.copyContents(source, ticket); !copied) {
             NoisyLog("Could not save ticket to %@ because an error occurred. %@", ticket, copied.error());
             return fail(copied.error());
         }

@@ -25,8 +25,9 @@ using foundation::Error;
 
 namespace {
 
-constexpr std::array<std::string_view, 8> kChanges{"createReplacementDirectory",
+constexpr std::array<std::string_view, 9> kChanges{"createReplacementDirectory",
                                                    "copyItem",
+                                                   "copyContents",
                                                    "removeItem",
                                                    "replaceItem",
                                                    "trashItem",
@@ -214,6 +215,11 @@ Result<URL> RecordingFileManager::createReplacementDirectory(const URL& item) {
 Result<void> RecordingFileManager::copyItem(const URL& source, const URL& destination) {
     if (auto failure = record_->note("copyItem", source.path(), destination.path())) return *failure;
     return real_->copyItem(source, destination);
+}
+
+Result<void> RecordingFileManager::copyContents(const URL& source, const URL& destination) {
+    if (auto failure = record_->note("copyContents", source.path(), destination.path())) return *failure;
+    return real_->copyContents(source, destination);
 }
 
 Result<void> RecordingFileManager::removeItem(const URL& item) {

@@ -68,6 +68,7 @@ class RecordingFileManager final : public files::FileManager {
     files::Result<bool> volumeSupportsCloning(const files::URL& item) override;
     files::Result<files::URL> createReplacementDirectory(const files::URL& item) override;
     files::Result<void> copyItem(const files::URL& source, const files::URL& destination) override;
+    files::Result<void> copyContents(const files::URL& source, const files::URL& destination) override;
     files::Result<void> removeItem(const files::URL& item) override;
     files::Result<void> replaceItem(const files::URL& original, const files::URL& replacement) override;
     files::Result<files::URL> trashItem(const files::URL& item) override;

@@ -77,6 +77,20 @@ class FailingCalls : public FilesTest {
     }
 };
 
+TEST_F(FailingCalls, InACopyOfContentsLeaveAllOfThemOrNone) {
+    const auto calls = failEachCall(
+        [&] { prepareFiles(); }, [&] { return outcome(manager->copyContents(url("original"), url("copy"))); },
+        [&](const std::string& failed, bool isError) {
+            EXPECT_EQ(readFile(path("original")), "old");
+            if (isError) {
+                EXPECT_THAT(namesIn(directory.path()), ElementsAre("original")) << failed;
+            } else {
+                EXPECT_EQ(readFile(path("copy")), "old");
+            }
+        });
+    EXPECT_THAT(calls, Contains("fsync"));
+}
+
 TEST_F(FailingCalls, InACopyLeaveAWholeCopyOrNone) {
     std::set<std::string> fatal;
     const auto calls = failEachCall(

@@ -1,6 +1,7 @@
 #include "src/PWHashedFile/PWHashedBundle.h"
 
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 
 #include <filesystem>
 
@@ -87,6 +88,16 @@ TEST_F(Bundle, StapledForTheFirstTimeHoldsTheSourceBytes) {
     EXPECT_FALSE(error.has_value());
 }
 
+TEST_F(Bundle, StapledFromAPrivateFileHoldsATicketThatOthersMayRead) {
+    std::filesystem::permissions(source().path(), std::filesystem::perms::owner_read);
+    const mode_t saved = umask(022);
+    EXPECT_TRUE(bundle.writeNewTicketDataFromURL(source(), nullptr));
+    umask(saved);
+    struct stat status {};
+    ASSERT_EQ(stat(ticketPath().c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 07777U, 0644U);
+}
+
 TEST_F(Bundle, RestapledHoldsTheNewTicketAlone) {
     test::writeFile(ticketPath(), std::string_view("AN OLDER AND MUCH LONGER TICKET"));
     EXPECT_TRUE(bundle.writeNewTicketDataFromURL(source(), nullptr));
@@ -143,7 +154,7 @@ TEST_F(Bundle, AnOldTicketThatCannotBeRemovedStays) {
 
 TEST_F(Bundle, ASecondCopyThatFailsLeavesNoTicket) {
     test::writeFile(ticketPath(), std::string_view("OLD"));
-    platform.files.fail("copyItem", ENOSPC);
+    platform.files.fail("copyContents", ENOSPC);
     std::optional<Error> error;
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_FALSE(bundle.writeNewTicketDataFromURL(source(), &error));
