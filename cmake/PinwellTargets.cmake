@@ -14,11 +14,15 @@ function(pinwell_executable name)
   target_link_libraries(${name} PRIVATE pinwell_warnings pinwell_hardening pinwell_sanitizers)
 endfunction()
 
-# pinwell_test(NAME SOURCES...): a GoogleTest program; every test in it is a ctest of its own.
+# pinwell_test(NAME [TIMEOUT SECONDS] SOURCES...): a GoogleTest program; every test in it is a ctest of its own.
 function(pinwell_test name)
-  add_executable(${name} ${ARGN})
+  cmake_parse_arguments(PARSE_ARGV 1 test "" "TIMEOUT" "")
+  if(NOT test_TIMEOUT)
+    set(test_TIMEOUT 120)
+  endif()
+  add_executable(${name} ${test_UNPARSED_ARGUMENTS})
   set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/tests)
   target_link_libraries(${name} PRIVATE pinwell_warnings pinwell_sanitizers test_support
                         GTest::gmock GTest::gtest_main)
-  gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST PROPERTIES TIMEOUT 120)
+  gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST PROPERTIES TIMEOUT ${test_TIMEOUT})
 endfunction()
