@@ -1,0 +1,140 @@
+#include "fixture.h"
+
+#include <algorithm>
+#include <filesystem>
+#include <ostream>
+
+#include "foundation/base64.h"
+
+namespace pinwell::test {
+
+using testing::AllOf;
+using testing::ElementsAreArray;
+using testing::Field;
+using testing::IsEmpty;
+using testing::Matcher;
+using testing::Optional;
+using testing::Property;
+using testing::StartsWith;
+
+void PrintTo(const ProcessResult& result, std::ostream* out) {
+    if (result.exitStatus)
+        *out << "a run that ended with status " << *result.exitStatus;
+    else
+        *out << "a run that was ended by signal " << result.signal;
+    *out << "\n--- standard output\n" << result.output << "--- standard error\n" << result.errors << "---";
+}
+
+Matcher<const ProcessResult&> Ended(int status, const Matcher<std::vector<std::string>>& lines) {
+    return AllOf(Field("exit status", &ProcessResult::exitStatus, Optional(status)),
+                 Property("lines of standard output", &ProcessResult::outputLines, lines),
+                 Field("standard error", &ProcessResult::errors, IsEmpty()));
+}
+
+Response answer(std::string body) {
+    return {.headers = {{"Content-Type", "application/json"}, {"X-Ostrel-Request-UUID", "REQUEST"}},
+            .body = std::move(body)};
+}
+
+std::string inlineRecord(const Data& ticket) {
+    return R"({"records":[{"recordName":"any","fields":{"signedTicket":{"type":"BYTES","value":")" +
+           foundation::encodeBase64(ticket) + R"("}}}]})";
+}
+
+EndToEndTest::EndToEndTest() : bundle(directory / "work/Sample.app") {
+    const Data codeDirectory = CodeDirectoryBuilder().covers(2, emptyRequirements()).build();
+    hash = codeHashOf(2, codeDirectory);
+    BundleBuilder()
+        .executable(
+            ExecutableImageBuilder().signature(SuperBlobBuilder::adHoc(codeDirectory).build()).build())
+        .write(bundle);
+
+    for (const char* name : {"home", "tmp", "platform"}) std::filesystem::create_directory(directory / name);
+    environment = {
+        {"HOME", directory / "home"},
+        {"XDG_CONFIG_HOME", directory / "home/config"},
+        {"XDG_DATA_HOME", directory / "home/data"},
+        {"XDG_CACHE_HOME", directory / "home/cache"},
+        {"TMPDIR", directory / "tmp"},
+        {"LC_ALL", "C"},
+        {"PINWELL_PLATFORM", directory / "platform"},
+    };
+    trust(ticketChain.root);
+}
+
+Command EndToEndTest::command(std::vector<std::string> arguments) const {
+    return {.executable = PINWELL_PROGRAM,
+            .arguments = std::move(arguments),
+            .environment = environment,
+            .workingDirectory = directory / "work"};
+}
+
+ProcessResult EndToEndTest::pinwell(std::vector<std::string> arguments) const {
+    return runProcess(command(std::move(arguments)));
+}
+
+Matcher<const ProcessResult&> EndToEndTest::FailedOnTheWay(
+    int code, std::vector<Matcher<std::string>> linesBefore) const {
+    std::vector<Matcher<std::string>> lines{processing()};
+    lines.insert(lines.end(), linesBefore.begin(), linesBefore.end());
+    lines.emplace_back(
+        StartsWith("error is Error Domain=URLErrorDomain Code=" + std::to_string(code) + " \""));
+    lines.emplace_back("Lumora's response is inconsistent with expections: (null)");
+    lines.emplace_back(stapleFailed(68));
+    return Ended(68, ElementsAreArray(lines));
+}
+
+void EndToEndTest::trust(const IssuedCertificate& certificate, const std::string& store) {
+    const std::string name = foundation::toHex(codeDigest(2, certificate.der)) + ".pem";
+    writeFile(directory / ("platform/" + store + "/" + name), certificate.pem());
+}
+
+void EndToEndTest::writePlatformSettings(std::string_view json) {
+    writeFile(directory / "platform/platform.json", json);
+}
+
+void EndToEndTest::contact(const std::string& host) {
+    writePlatformSettings(R"({"lumora":{"host":")" + host + R"("}})");
+}
+
+HostileServer& EndToEndTest::service() {
+    if (!service_) {
+        trust(serverChain.root);
+        startService(identityOf(serverChain));
+    }
+    return *service_;
+}
+
+HostileServer& EndToEndTest::startService(const ServerIdentity& identity, const std::string& host,
+                                          HostileServerOptions options) {
+    service_ = std::make_unique<HostileServer>(identity, std::move(options));
+    contact(host + ":" + std::to_string(service_->port()));
+    return *service_;
+}
+
+void EndToEndTest::serve(Response response) {
+    service().setHandler([response](const RecordedRequest&) { return response; });
+}
+
+TicketPayloadBuilder EndToEndTest::payload() const {
+    return TicketPayloadBuilder().entry(2, hash);
+}
+
+Data EndToEndTest::sealed(const TicketPayloadBuilder& payload) const {
+    return SatchelBuilder::of(ticketChain, payload.build()).build();
+}
+
+std::optional<Data> EndToEndTest::stapled() const {
+    if (!std::filesystem::is_regular_file(std::filesystem::symlink_status(ticketPath()))) return std::nullopt;
+    return foundation::toData(readFile(ticketPath()));
+}
+
+std::vector<std::string> EndToEndTest::namesBelow(const std::string& path) {
+    std::vector<std::string> names;
+    for (const auto& entry : std::filesystem::recursive_directory_iterator(path))
+        names.push_back(entry.path().lexically_relative(path).native());
+    std::sort(names.begin(), names.end());
+    return names;
+}
+
+}  // namespace pinwell::test

@@ -1,0 +1,127 @@
+// A place to run the real tool in: a signed bundle, genuine tickets for it, a platform directory that trusts
+// them, a record service that does what the test says, and an environment in which nothing is the developer's
+// own.
+//
+//   TEST_F(Lookup, SaysWhyThereIsNoTicket) {
+//       serve(answer(R"({"records":[{"reason":"Record not found"}]})"));
+//       EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(), ...)));
+//   }
+//
+// Everything lives below one temporary directory, and every test has its own.
+#pragma once
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "support/certificate_builder.h"
+#include "support/code_directory_builder.h"
+#include "support/executable_image_builder.h"
+#include "support/hostile_server.h"
+#include "support/process.h"
+#include "support/temporary_directory.h"
+#include "support/ticket_builder.h"
+
+namespace pinwell::test {
+
+using foundation::Data;
+
+/// Shown when an expectation about a run fails.
+void PrintTo(const ProcessResult& result, std::ostream* out);
+
+/// A run that ended with this status, said these lines on standard output, and nothing on standard error.
+testing::Matcher<const ProcessResult&> Ended(int status,
+                                             const testing::Matcher<std::vector<std::string>>& lines);
+
+/// An answer of the record service with this body: status 200, request identifier "REQUEST".
+Response answer(std::string body);
+
+/// The body of an answer whose record holds this ticket.
+std::string inlineRecord(const Data& ticket);
+
+class EndToEndTest : public testing::Test {
+  protected:
+    EndToEndTest();
+
+    // Running the tool.
+
+    Command command(std::vector<std::string> arguments) const;
+    ProcessResult pinwell(std::vector<std::string> arguments) const;
+    ProcessResult staple() const { return pinwell({"staple", bundle}); }
+    ProcessResult validate() const { return pinwell({"validate", bundle}); }
+
+    // What it always says.
+
+    std::string processing() const { return "Processing: " + bundle; }
+    std::string prettyHash() const { return "2/" + foundation::toHex(hash); }
+    std::string noTicketLine() const {
+        return "Could not find base64 encoded ticket in response for " + prettyHash();
+    }
+    static std::string stapleFailed(int status) {
+        return "The staple and validate action failed! Error " + std::to_string(status) + ".";
+    }
+    static std::string validateFailed(int status) {
+        return "The validate action failed! Error " + std::to_string(status) + ".";
+    }
+
+    /// The end of a staple whose lookup failed on the way, with that code of URLErrorDomain, after these
+    /// lines.
+    testing::Matcher<const ProcessResult&> FailedOnTheWay(
+        int code, std::vector<testing::Matcher<std::string>> linesBefore = {}) const;
+
+    // The platform directory.
+
+    /// Adds a certificate, by default to the maker's own roots.
+    void trust(const IssuedCertificate& certificate, const std::string& store = "roots");
+    void writePlatformSettings(std::string_view json);
+    /// Whom to ask for records: HOST or HOST:PORT.
+    void contact(const std::string& host);
+
+    // The record service.
+
+    /// Starts it on first use: a well-behaved one under 127.0.0.1, whose root is trusted.
+    HostileServer& service();
+    /// Starts it under another identity, and names it in platform.json as `host`. Trusts nobody.
+    HostileServer& startService(const ServerIdentity& identity, const std::string& host = "127.0.0.1",
+                                HostileServerOptions options = {});
+    /// Every request is answered so.
+    void serve(Response response);
+    void serveTicket(const Data& ticket) { serve(answer(inlineRecord(ticket))); }
+
+    // Tickets.
+
+    /// Lists the bundle's hash.
+    TicketPayloadBuilder payload() const;
+    Data sealed(const TicketPayloadBuilder& payload) const;
+    Data ticket() const { return sealed(payload()); }
+    Data revokedTicket() const { return sealed(payload().revoked()); }
+    Data ticketForOthers() const { return sealed(TicketPayloadBuilder().entry(2, hashOf(0x77))); }
+
+    // What is on the disk.
+
+    std::string ticketPath() const { return bundle + "/Contents/CodeResources"; }
+    void stapleByHand(const Data& ticket) { writeFile(ticketPath(), ticket); }
+    /// The bytes of the stapled ticket; nothing when there is no regular file.
+    std::optional<Data> stapled() const;
+    /// Everything below a directory, by its path from there, sorted.
+    static std::vector<std::string> namesBelow(const std::string& path);
+    /// The same of the temporary directory that the tool was given.
+    std::vector<std::string> temporaryFiles() const { return namesBelow(directory / "tmp"); }
+    std::string temporaryPath(const std::string& name) const { return directory / ("tmp/" + name); }
+
+    TemporaryDirectory directory;
+    Environment environment;
+    IssuedChain ticketChain = TicketChain().issue();
+    IssuedChain serverChain = ServerChain("127.0.0.1").issue();
+    Data hash;  // of the bundle: 20 bytes, algorithm 2
+    std::string bundle;
+
+  private:
+    std::unique_ptr<HostileServer> service_;
+};
+
+}  // namespace pinwell::test
