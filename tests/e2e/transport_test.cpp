@@ -1,0 +1,267 @@
+// What can go wrong between the tool and the record service: connections that break off, answers without measure,
+// redirects.
+#include "fixture.h"
+#include "foundation/format.h"
+
+namespace pinwell::test {
+namespace {
+
+using testing::AllOf;
+using testing::ElementsAre;
+using testing::HasSubstr;
+using testing::IsEmpty;
+using testing::StartsWith;
+
+// Codes of URLErrorDomain.
+constexpr int kUnsupportedURL = 2;
+constexpr int kCannotConnect = 4;
+constexpr int kTooManyRedirects = 6;
+constexpr int kTooLarge = 7;
+constexpr int kSecureConnectionFailed = 8;
+constexpr int kBadServerResponse = 9;
+constexpr int kConnectionLost = 10;
+
+constexpr const char* kWorked = "The staple and validate action worked!";
+constexpr std::size_t kMebibyte = std::size_t{1} << 20U;
+
+class Transport : public EndToEndTest {
+  protected:
+    ProcessResult stapleFrom(Script script) {
+        service().enqueue(std::move(script));
+        return staple();
+    }
+    testing::Matcher<const ProcessResult&> Worked() const {
+        return Ended(0, ElementsAre(processing(), processing(), kWorked));
+    }
+    void TearDown() override {
+        if (!stapled()) {
+            EXPECT_THAT(temporaryFiles(), IsEmpty());
+        }
+    }
+
+    const std::string body = inlineRecord(ticket());
+    const std::string head = "HTTP/1.1 200 OK\r\nContent-Length: " + std::to_string(body.size()) + "\r\n";
+};
+
+// Connections.
+
+TEST_F(Transport, NobodyListens) {
+    std::string host;
+    {
+        const HostileServer gone(identityOf(serverChain));
+        host = "127.0.0.1:" + std::to_string(gone.port());
+    }
+    contact(host);
+    EXPECT_THAT(staple(), FailedOnTheWay(kCannotConnect));
+}
+
+TEST_F(Transport, TheServerClosesAtOnce) {
+    EXPECT_THAT(stapleFrom(Script().reset()), AllOf(testing::Field(&ProcessResult::exitStatus, 68),
+                                                    testing::Field(&ProcessResult::output, HasSubstr(stapleFailed(68)))));
+}
+
+TEST_F(Transport, TheServerDoesNotSpeakTLS) {
+    EXPECT_THAT(stapleFrom(Script().sendPlain("HTTP/1.1 200 OK\r\n\r\n{}").close()),
+                FailedOnTheWay(kSecureConnectionFailed));
+    EXPECT_THAT(stapleFrom(Script().sendPlain(std::string(4096, '\xff')).close()),
+                FailedOnTheWay(kSecureConnectionFailed));
+}
+
+TEST_F(Transport, CutAfterTheHandshake) {
+    EXPECT_THAT(stapleFrom(Script().handshake().cut()), FailedOnTheWay(kConnectionLost));
+}
+
+TEST_F(Transport, CutAfterTheRequest) {
+    EXPECT_THAT(stapleFrom(Script().readRequest().cut()), FailedOnTheWay(kConnectionLost));
+    EXPECT_THAT(stapleFrom(Script().readRequest().reset()), FailedOnTheWay(kConnectionLost));
+}
+
+TEST_F(Transport, ClosedInOrderWithoutAnAnswer) {
+    EXPECT_THAT(stapleFrom(Script().readRequest().close()), FailedOnTheWay(kConnectionLost));
+}
+
+TEST_F(Transport, CutInTheHead) {
+    EXPECT_EQ(stapleFrom(Script().readRequest().send("HTTP/1.1 200 OK\r\nContent-").cut()).exitStatus, 68);
+    EXPECT_EQ(stapled(), std::nullopt);
+}
+
+TEST_F(Transport, CutInTheBody) {
+    EXPECT_THAT(stapleFrom(Script().readRequest().send(head + "\r\n" + body.substr(0, body.size() - 1)).cut()),
+                FailedOnTheWay(kConnectionLost));
+    EXPECT_THAT(stapleFrom(Script().readRequest().send(head + "\r\n" + body.substr(0, 10)).close()),
+                FailedOnTheWay(kConnectionLost));
+}
+
+TEST_F(Transport, ABodyOfUnknownLengthThatIsCutIsNoAnswer) {
+    // Without a length, the orderly end of the connection is what tells a whole body from a part of one.
+    EXPECT_THAT(stapleFrom(Script().readRequest().send("HTTP/1.1 200 OK\r\n\r\n" + body).cut()),
+                FailedOnTheWay(kConnectionLost));
+    EXPECT_THAT(stapleFrom(Script().readRequest().send("HTTP/1.1 200 OK\r\n\r\n" + body).close()), Worked());
+}
+
+TEST_F(Transport, AnAnswerThatIsNotHTTP) {
+    EXPECT_EQ(stapleFrom(Script().readRequest().send("SSH-2.0-server\r\n\r\n").close()).exitStatus, 68);
+    EXPECT_EQ(stapleFrom(Script().readRequest().send("HTTP/0.9\r\n\r\n" + body).close()).exitStatus, 68);
+    EXPECT_EQ(stapleFrom(Script().readRequest().send(body).close()).exitStatus, 68);
+    EXPECT_EQ(stapled(), std::nullopt);
+}
+
+TEST_F(Transport, AnAnswerThatComesByteByByteIsAnAnswer) {
+    EXPECT_THAT(stapleFrom(Script().readRequest().drip(head + "\r\n" + body)), Worked());
+}
+
+TEST_F(Transport, AnAnswerInChunksIsAnAnswer) {
+    std::string chunks;
+    for (std::size_t at = 0; at < body.size(); at += 15)
+        chunks += foundation::format("%x\r\n", static_cast<std::uint32_t>(body.substr(at, 15).size())) +
+                  body.substr(at, 15) + "\r\n";
+    const std::string chunkedHead = "HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n";
+    EXPECT_THAT(stapleFrom(Script().readRequest().send(chunkedHead + chunks + "0\r\n\r\n")), Worked());
+}
+
+TEST_F(Transport, AnAnswerWhoseLastChunkIsMissingIsNone) {
+    EXPECT_EQ(stapleFrom(Script()
+                             .readRequest()
+                             .send("HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n" +
+                                   foundation::format("%zx\r\n", body.size()) + body + "\r\n")
+                             .close())
+                  .exitStatus,
+              68);
+    EXPECT_EQ(stapled(), std::nullopt);
+}
+
+TEST_F(Transport, AnInformationalAnswerComesBeforeTheAnswer) {
+    EXPECT_THAT(stapleFrom(Script().readRequest().send("HTTP/1.1 103 Early Hints\r\nX-Ostrel-Request-UUID: EARLY\r\n"
+                                                       "\r\n" +
+                                                       answer(body).bytes())),
+                Worked());
+    EXPECT_THAT(temporaryFiles(), ElementsAre("REQUEST.ticket"));
+}
+
+// Answers.
+
+TEST_F(Transport, AnEmptyBodyIsInconsistentWhateverItsStatus) {
+    for (const int status : {200, 404, 500}) {
+        Response empty = answer("");
+        empty.status = status;
+        serve(empty);
+        EXPECT_THAT(staple(), Ended(68, ElementsAre(processing(),
+                                                    AllOf(StartsWith("Lumora's response is inconsistent with expections: "),
+                                                          HasSubstr("Status Code: " + std::to_string(status))),
+                                                    stapleFailed(68))))
+            << status;
+    }
+}
+
+TEST_F(Transport, NoContentIsInconsistent) {
+    EXPECT_THAT(stapleFrom(Script().readRequest().send("HTTP/1.1 204 No Content\r\n\r\n").close()),
+                Ended(68, ElementsAre(processing(),
+                                      StartsWith("Lumora's response is inconsistent with expections: { URL: https://"),
+                                      stapleFailed(68))));
+}
+
+TEST_F(Transport, HeadersCannotDriveTheTerminal) {
+    const ProcessResult result =
+        stapleFrom(Script().readRequest().send("HTTP/1.1 200 OK\r\nX-A: a\x1b[2Jb\r\nContent-Length: 0\r\n\r\n").close());
+    EXPECT_EQ(result.exitStatus, 68);
+    EXPECT_THAT(result.output, testing::Not(HasSubstr("\x1b")));
+}
+
+TEST_F(Transport, AnAnswerThatAnnouncesMoreThanIsReadIsRefusedBeforeItComes) {
+    EXPECT_THAT(stapleFrom(Script()
+                               .readRequest()
+                               .send("HTTP/1.1 200 OK\r\nContent-Length: " + std::to_string(64 * kMebibyte + 1) +
+                                     "\r\n\r\n")
+                               .drain()),
+                FailedOnTheWay(kTooLarge));
+}
+
+TEST_F(Transport, AnAnswerWithoutEndIsRefused) {
+    EXPECT_THAT(stapleFrom(Script()
+                               .readRequest()
+                               .send("HTTP/1.1 200 OK\r\n\r\n")
+                               .sendEndlessly(std::string(kMebibyte, ' '))),
+                FailedOnTheWay(kTooLarge));
+}
+
+TEST_F(Transport, AHeadWithoutEndIsRefused) {
+    EXPECT_THAT(stapleFrom(Script()
+                               .readRequest()
+                               .send("HTTP/1.1 200 OK\r\n")
+                               .sendEndlessly("X-Filler: " + std::string(1000, 'a') + "\r\n")),
+                FailedOnTheWay(kTooLarge));
+}
+
+// Redirects.
+
+TEST_F(Transport, ARedirectIsFollowedAndItsAnswerIsTheAnswer) {
+    service().enqueue(Script().respond({.status = 307, .headers = {{"Location", "/elsewhere"}}, .body = "moved"}));
+    service().enqueue(Script().respond(answer(body)));
+    EXPECT_THAT(staple(), Worked());
+    const auto requests = service().requests();
+    ASSERT_EQ(requests.size(), 2U);
+    EXPECT_EQ(requests[1].target, "/elsewhere");
+}
+
+TEST_F(Transport, ARedirectMayLeadToAnotherHost) {
+    HostileServer other(identityOf(ServerChain("localhost").issue()));  // of the same root
+    other.setHandler([this](const RecordedRequest&) { return answer(body); });
+    service().enqueue(Script().respond({.status = 302, .headers = {{"Location", other.url("/there", "localhost")}}}));
+    EXPECT_THAT(staple(), Worked());
+    EXPECT_EQ(other.requests().at(0).method, "GET");
+}
+
+TEST_F(Transport, MovedFoundAndSeeOtherTurnThePostIntoAGet) {
+    for (const int status : {301, 302, 303}) {
+        service().enqueue(Script().respond({.status = status, .headers = {{"Location", "/there"}}}));
+        service().enqueue(Script().respond(answer(body)));
+        EXPECT_EQ(staple().exitStatus, 0) << status;
+        EXPECT_EQ(service().requests().back().method, "GET") << status;
+        EXPECT_EQ(service().requests().back().body, "") << status;
+    }
+}
+
+TEST_F(Transport, TemporaryAndPermanentRedirectsKeepThePost) {
+    for (const int status : {307, 308}) {
+        service().enqueue(Script().respond({.status = status, .headers = {{"Location", "/there"}}}));
+        service().enqueue(Script().respond(answer(body)));
+        EXPECT_EQ(staple().exitStatus, 0) << status;
+        EXPECT_EQ(service().requests().back().method, "POST") << status;
+        EXPECT_EQ(service().requests().back().body, service().requests().front().body) << status;
+        EXPECT_EQ(service().requests().back().header("Content-Type"), "application/json") << status;
+    }
+}
+
+TEST_F(Transport, ARedirectToAnythingButHTTPSIsRefused) {
+    for (const char* target : {"http://127.0.0.1/", "ftp://127.0.0.1/", "file:///etc/passwd", "javascript:1"}) {
+        service().enqueue(Script().respond({.status = 302, .headers = {{"Location", target}}, .body = body}));
+        EXPECT_THAT(staple(), FailedOnTheWay(kUnsupportedURL)) << target;
+    }
+}
+
+TEST_F(Transport, AnyOtherRedirectIsRefused) {
+    for (const int status : {300, 305, 306}) {
+        service().enqueue(Script().respond({.status = status, .headers = {{"Location", "/there"}}, .body = body}));
+        EXPECT_THAT(staple(), FailedOnTheWay(kUnsupportedURL)) << status;
+    }
+}
+
+TEST_F(Transport, TenRedirectsAreFollowedAndNoMore) {
+    const Response onward{.status = 307, .headers = {{"Location", "/again"}}};
+    for (int i = 0; i < 10; ++i) service().enqueue(Script().respond(onward));
+    service().enqueue(Script().respond(answer(body)));
+    EXPECT_THAT(staple(), Worked());
+    serve(onward);
+    EXPECT_THAT(staple(), FailedOnTheWay(kTooManyRedirects));
+    EXPECT_EQ(service().requests().size(), 22U);
+}
+
+TEST_F(Transport, ARedirectWithoutATargetIsAnAnswer) {
+    Response odd = answer(body);
+    odd.status = 302;
+    serve(odd);
+    EXPECT_THAT(staple(), Worked());
+}
+
+}  // namespace
+}  // namespace pinwell::test
