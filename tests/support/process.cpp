@@ -113,6 +113,10 @@ FileDescriptor connectOutput(FileActions& actions, Output output, int descriptor
         actions.close(descriptor);
         return {};
     }
+    if (output == Output::full) {
+        actions.open(descriptor, "/dev/full");
+        return {};
+    }
     Pipe& pipe = pipes.emplace_back();
     actions.duplicate(pipe.writeEnd, descriptor);
     if (output == Output::captured) return std::move(pipe.readEnd);

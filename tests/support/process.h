@@ -31,6 +31,7 @@ enum class Output {
     captured,
     closed,      // the descriptor is not open at all
     brokenPipe,  // a pipe that nobody reads
+    full,        // a device with no space left
 };
 
 struct Command {

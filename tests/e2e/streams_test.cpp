@@ -1,0 +1,98 @@
+// Runs whose standard streams are not what they should be: a message is never worth a staple.
+#include <csignal>
+
+#include "fixture.h"
+
+namespace pinwell::test {
+namespace {
+
+using testing::ElementsAre;
+using testing::IsEmpty;
+
+class Streams : public EndToEndTest {
+  protected:
+    Streams() { serveTicket(genuine); }
+
+    /// Whatever could not be said, nothing of it may end up in a file or on the wire.
+    void expectGoodStaple(const Command& run) {
+        const ProcessResult result = runProcess(run);
+        EXPECT_EQ(result.exitStatus, 0);
+        EXPECT_EQ(result.signal, 0);
+        EXPECT_EQ(result.errors, "");
+        EXPECT_EQ(stapled(), genuine);
+        EXPECT_THAT(temporaryFiles(), ElementsAre("REQUEST.ticket"));
+        EXPECT_EQ(readFile(temporaryPath("REQUEST.ticket")), foundation::toString(genuine));
+        ASSERT_EQ(service().requests().size(), 1U);
+        EXPECT_EQ(service().requests()[0].body, R"({"records":[{"recordName":")" + ("2/" + prettyHash()) + R"("}]})");
+    }
+    /// As talkative as it gets.
+    Command verboseStaple() const { return command({"staple", "-v", bundle}); }
+
+    const Data genuine = ticket();
+};
+
+TEST_F(Streams, NobodyReadsStandardOutput) {
+    Command run = verboseStaple();
+    run.output = Output::brokenPipe;
+    expectGoodStaple(run);
+}
+
+TEST_F(Streams, StandardOutputIsFull) {
+    Command run = verboseStaple();
+    run.output = Output::full;
+    expectGoodStaple(run);
+}
+
+TEST_F(Streams, StandardOutputIsClosed) {
+    Command run = verboseStaple();
+    run.output = Output::closed;
+    expectGoodStaple(run);
+}
+
+TEST_F(Streams, StandardInputIsClosed) {
+    Command run = verboseStaple();
+    run.hasInput = false;
+    expectGoodStaple(run);
+}
+
+TEST_F(Streams, AllStreamsAreClosed) {
+    Command run = verboseStaple();
+    run.hasInput = false;
+    run.output = Output::closed;
+    run.errors = Output::closed;
+    expectGoodStaple(run);
+}
+
+TEST_F(Streams, AValidationOnAClosedOutputChangesNothing) {
+    stapleByHand(genuine);
+    Command run = command({"validate", "-v", bundle});
+    run.output = Output::closed;
+    expectGoodStaple(run);
+}
+
+TEST_F(Streams, ALargeTicketOnAClosedOutputIsWhole) {
+    const std::string url = service().url("/${f}");
+    const std::string record = R"({"records":[{"fields":{"signedTicketAsset":{"value":{"downloadURL":")" + url +
+                               R"(","size":)" + std::to_string(genuine.size()) + "}}}}]}";
+    service().setHandler([this, record](const RecordedRequest& request) {
+        return request.method == "POST" ? answer(record) : Response{.body = foundation::toString(genuine)};
+    });
+    Command run = verboseStaple();
+    run.output = Output::closed;
+    EXPECT_EQ(runProcess(run).exitStatus, 0);
+    EXPECT_EQ(stapled(), genuine);
+}
+
+TEST_F(Streams, NobodyReadsTheUsage) {
+    for (const Output errors : {Output::brokenPipe, Output::closed, Output::full}) {
+        Command run = command({"stapel", bundle});
+        run.errors = errors;
+        const ProcessResult result = runProcess(run);
+        EXPECT_EQ(result.exitStatus, 64);
+        EXPECT_EQ(result.output, "");
+    }
+    EXPECT_THAT(service().connections(), IsEmpty());
+}
+
+}  // namespace
+}  // namespace pinwell::test
