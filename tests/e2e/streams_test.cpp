@@ -1,5 +1,5 @@
 // Runs whose standard streams are not what they should be: a message is never worth a staple.
-#include <csignal>
+#include <filesystem>
 
 #include "fixture.h"
 
@@ -61,6 +61,25 @@ TEST_F(Streams, AllStreamsAreClosed) {
     run.output = Output::closed;
     run.errors = Output::closed;
     expectGoodStaple(run);
+}
+
+TEST_F(Streams, NothingElseTakesThePlaceOfAClosedStream) {
+    // Or a message would go to whatever did: a connection, or a file.
+    const Gate gate;
+    service().enqueue(Script().readRequest().waitFor(gate).send(answer(inlineRecord(genuine)).bytes()));
+    Command closed = verboseStaple();
+    closed.hasInput = false;
+    closed.output = Output::closed;
+    closed.errors = Output::closed;
+    RunningProcess run(closed);
+    ASSERT_TRUE(gate.waitUntilReached());
+    for (const char* descriptor : {"0", "1", "2"}) {
+        const std::string link = "/proc/" + std::to_string(run.id()) + "/fd/" + descriptor;
+        EXPECT_EQ(std::filesystem::read_symlink(link), "/dev/null") << descriptor;
+    }
+    gate.open();
+    EXPECT_EQ(run.wait().exitStatus, 0);
+    EXPECT_EQ(stapled(), genuine);
 }
 
 TEST_F(Streams, AValidationOnAClosedOutputChangesNothing) {

@@ -252,6 +252,10 @@ bool RunningProcess::isRunning() {
     return ::poll(&wait, 1, 0) == 0;
 }
 
+int RunningProcess::id() const noexcept {
+    return state_->id;
+}
+
 void RunningProcess::sendSignal(int number) {
     if (!state_->ended) state_->send(number);
 }

@@ -73,6 +73,9 @@ class RunningProcess {
 
     bool isRunning();
 
+    /// Its process number, good for as long as the child has not been waited for.
+    int id() const noexcept;
+
     void sendSignal(int number);
 
     /// Waits for its end. A child that had to be killed is a test failure, and so ends with SIGKILL.
