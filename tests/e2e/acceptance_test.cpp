@@ -14,7 +14,8 @@ using testing::StartsWith;
 
 constexpr const char* kStapled = "The staple and validate action worked!";
 constexpr const char* kValidated = "The validate action worked!";
-constexpr const char* kRevoked = "The ticket for Sample.app has been revoked. Tollmark will prevent it from running.";
+constexpr const char* kRevoked =
+    "The ticket for Sample.app has been revoked. Tollmark will prevent it from running.";
 
 class Acceptance : public EndToEndTest {
   protected:
@@ -61,14 +62,17 @@ TEST_F(Acceptance, AnyEntryOfATicketWillDo) {
 
 TEST_F(Acceptance, TheAlgorithmOfATwentyByteEntryDoesNotMatter) {
     for (const std::uint8_t algorithm : std::initializer_list<std::uint8_t>{1, 2, 3})
-        EXPECT_THAT(stapleTicket(sealed(TicketPayloadBuilder().entry(algorithm, hash))), Worked()) << int{algorithm};
+        EXPECT_THAT(stapleTicket(sealed(TicketPayloadBuilder().entry(algorithm, hash))), Worked())
+            << int{algorithm};
     EXPECT_THAT(stapleTicket(sealed(TicketPayloadBuilder().version(1).entry(0, hash))), Worked());
 }
 
 TEST_F(Acceptance, AnEntryThatCannotBeReadIsPassedOver) {
     for (const std::uint8_t algorithm : std::initializer_list<std::uint8_t>{0, 4, 5, 255}) {
-        EXPECT_THAT(stapleTicket(sealed(TicketPayloadBuilder().entry(algorithm, hash))), Refused()) << int{algorithm};
-        EXPECT_THAT(stapleTicket(sealed(TicketPayloadBuilder().entry(algorithm, hash).entry(2, hash))), Worked())
+        EXPECT_THAT(stapleTicket(sealed(TicketPayloadBuilder().entry(algorithm, hash))), Refused())
+            << int{algorithm};
+        EXPECT_THAT(stapleTicket(sealed(TicketPayloadBuilder().entry(algorithm, hash).entry(2, hash))),
+                    Worked())
             << int{algorithm};
     }
 }
@@ -102,7 +106,8 @@ TEST_F(Acceptance, ATicketWhoseSignerTheUserDeniesIsRefused) {
 
 TEST_F(Acceptance, ATicketStaysGoodWhenItsCertificatesHaveExpired) {
     TicketChain aged;
-    for (CertificateFields* fields : {&aged.root, &aged.intermediate, &aged.leaf}) fields->notAfter = {1600000000};
+    for (CertificateFields* fields : {&aged.root, &aged.intermediate, &aged.leaf})
+        fields->notAfter = {1600000000};
     ticketChain = aged.issue();
     trust(ticketChain.root);
     EXPECT_THAT(stapleTicket(ticket()), Worked());
@@ -110,7 +115,8 @@ TEST_F(Acceptance, ATicketStaysGoodWhenItsCertificatesHaveExpired) {
 }
 
 TEST_F(Acceptance, NoByteOfATicketMayChange) {
-    const Data genuine = container(payload().build()).signatureSize(72).build();  // no padding: every byte counts
+    const Data genuine =
+        container(payload().build()).signatureSize(72).build();  // no padding: every byte counts
     ASSERT_THAT(stapleTicket(genuine), Worked());
     std::filesystem::remove(ticketPath());
     for (std::size_t at = 0; at < genuine.size(); at += 41) {
@@ -124,7 +130,8 @@ TEST_F(Acceptance, NoByteOfATicketMayChange) {
 TEST_F(Acceptance, ATicketMustBeWhole) {
     const Data genuine = ticket();
     for (const std::size_t size : {std::size_t{1}, std::size_t{16}, genuine.size() / 2, genuine.size() - 1})
-        EXPECT_THAT(stapleTicket({genuine.begin(), genuine.begin() + static_cast<std::ptrdiff_t>(size)}), Refused());
+        EXPECT_THAT(stapleTicket({genuine.begin(), genuine.begin() + static_cast<std::ptrdiff_t>(size)}),
+                    Refused());
     Data longer = genuine;
     longer.push_back(std::byte{0});
     EXPECT_THAT(stapleTicket(longer), Refused());
@@ -132,7 +139,8 @@ TEST_F(Acceptance, ATicketMustBeWhole) {
 
 TEST_F(Acceptance, LengthsBeyondTheTicketAreRefused) {
     for (const std::uint32_t length : {0xFFFFFFFFU, 0x80000000U, 0U}) {
-        EXPECT_THAT(stapleTicket(container(payload().build()).certificateBlockLength(length).build()), Refused());
+        EXPECT_THAT(stapleTicket(container(payload().build()).certificateBlockLength(length).build()),
+                    Refused());
         EXPECT_THAT(stapleTicket(container(payload().build()).payloadLength(length).build()), Refused());
         EXPECT_THAT(stapleTicket(sealed(payload().count(length == 0 ? 2 : length))), Refused());
     }
@@ -195,14 +203,15 @@ TEST_F(Acceptance, AValidationFailsWhenTheServicesTicketDoes) {
 TEST_F(Acceptance, AValidationFailsWhenTheServiceHasNoTicket) {
     stapleByHand(ticket());
     serve(answer(R"({"records":[{"reason":"Record not found"}]})"));
-    EXPECT_THAT(validate(), Ended(65, ElementsAre(processing(), StartsWith("Lumora query for Sample.app "), noTicketLine(),
-                                                  validateFailed(65))));
+    EXPECT_THAT(validate(), Ended(65, ElementsAre(processing(), StartsWith("Lumora query for Sample.app "),
+                                                  noTicketLine(), validateFailed(65))));
 }
 
 TEST_F(Acceptance, AValidationFailsWhenTheServiceCannotBeReached) {
     stapleByHand(ticket());
     contact("127.0.0.1:1");
-    EXPECT_THAT(validate(), Ended(68, ElementsAre(processing(), StartsWith("error is Error Domain=URLErrorDomain Code=4 "),
+    EXPECT_THAT(validate(), Ended(68, ElementsAre(processing(),
+                                                  StartsWith("error is Error Domain=URLErrorDomain Code=4 "),
                                                   "Lumora's response is inconsistent with expections: (null)",
                                                   validateFailed(68))));
 }
@@ -211,8 +220,10 @@ TEST_F(Acceptance, AValidationFailsWhenTheServiceCannotBeReached) {
 
 TEST_F(Acceptance, ATicketThatCannotBeKeptIsNotStapled) {
     environment["TMPDIR"] = directory / "nowhere";
-    const std::string url = foundation::URL::fileURLWithPath(directory / "nowhere/REQUEST.ticket").absoluteString();
-    const auto line = StartsWith("Could not write ticket to " + url + " due to Error Domain=POSIXErrorDomain Code=2 ");
+    const std::string url =
+        foundation::URL::fileURLWithPath(directory / "nowhere/REQUEST.ticket").absoluteString();
+    const auto line =
+        StartsWith("Could not write ticket to " + url + " due to Error Domain=POSIXErrorDomain Code=2 ");
     EXPECT_THAT(stapleTicket(ticket()), Ended(73, ElementsAre(processing(), line, stapleFailed(73))));
     EXPECT_EQ(stapled(), std::nullopt);
 
@@ -223,7 +234,8 @@ TEST_F(Acceptance, ATicketThatCannotBeKeptIsNotStapled) {
 TEST_F(Acceptance, ADirectoryInTheTicketFilesPlaceIsNotReplaced) {
     std::filesystem::create_directory(temporaryPath("REQUEST.ticket"));
     EXPECT_THAT(stapleTicket(ticket()),
-                Ended(73, ElementsAre(processing(), StartsWith("Could not write ticket to file://"), stapleFailed(73))));
+                Ended(73, ElementsAre(processing(), StartsWith("Could not write ticket to file://"),
+                                      stapleFailed(73))));
     EXPECT_EQ(stapled(), std::nullopt);
     EXPECT_THAT(temporaryFiles(), ElementsAre("REQUEST.ticket"));
 }
@@ -258,13 +270,16 @@ class ChangingFile : public Acceptance {
 };
 
 TEST_F(ChangingFile, IsReadAfreshAfterTheWrite) {
-    const Data other = CodeDirectoryBuilder().identifier("com.example.other").covers(2, emptyRequirements()).build();
-    EXPECT_THAT(stapleWhile([&] {
-                    BundleBuilder()
-                        .executable(ExecutableImageBuilder().signature(SuperBlobBuilder::adHoc(other).build()).build())
-                        .write(bundle);
-                }),
-                Ended(73, ElementsAre(processing(), processing(), writtenInVain(), stapleFailed(73))));
+    const Data other =
+        CodeDirectoryBuilder().identifier("com.example.other").covers(2, emptyRequirements()).build();
+    EXPECT_THAT(
+        stapleWhile([&] {
+            BundleBuilder()
+                .executable(
+                    ExecutableImageBuilder().signature(SuperBlobBuilder::adHoc(other).build()).build())
+                .write(bundle);
+        }),
+        Ended(73, ElementsAre(processing(), processing(), writtenInVain(), stapleFailed(73))));
 }
 
 TEST_F(ChangingFile, ThatLosesItsSignatureIsNoLongerVouchedFor) {
@@ -278,8 +293,9 @@ TEST_F(ChangingFile, ThatBecomesAnotherKindCannotBeReadBack) {
     std::filesystem::rename(bundle, generic);
     bundle = generic;
     EXPECT_THAT(stapleWhile([&] { std::filesystem::remove(bundle + "/Contents/Programs/Sample"); }),
-                Ended(73, ElementsAre(processing(), processing(), "Pinwell is incapable of working with folder files.",
-                                      writtenInVain(), stapleFailed(73))));
+                Ended(73, ElementsAre(processing(), processing(),
+                                      "Pinwell is incapable of working with folder files.", writtenInVain(),
+                                      stapleFailed(73))));
 }
 
 TEST_F(ChangingFile, ThatVanishesCannotBeWrittenTo) {

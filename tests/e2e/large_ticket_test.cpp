@@ -35,7 +35,8 @@ class LargeTicket : public EndToEndTest {
     }
     /// As announced, from the record service's own host.
     void deliver(const Data& ticket) {
-        deliver(assetRecord(service().url("/assets/${f}"), ticket.size()), {.body = foundation::toString(ticket)});
+        deliver(assetRecord(service().url("/assets/${f}"), ticket.size()),
+                {.body = foundation::toString(ticket)});
     }
 
     /// A run whose download fails says so and then does nothing more, for ever.
@@ -91,11 +92,12 @@ TEST_F(LargeTicket, MayBeLarge) {
 
 TEST_F(LargeTicket, SaysWhatItFetchesInVerboseMode) {
     deliver(genuine);
-    EXPECT_THAT(pinwell({"staple", "-v", bundle}),
-                Ended(0, AllOf(Contains("URL of large ticket asset: " + service().url("/assets/lmasset.ticket")),
-                               Contains(StartsWith("Big ticket response is { URL: ")),
-                               Contains("Downloaded large ticket size is 1 KB"),
-                               Contains("Domain is 127.0.0.1").Times(2))));
+    EXPECT_THAT(
+        pinwell({"staple", "-v", bundle}),
+        Ended(0, AllOf(Contains("URL of large ticket asset: " + service().url("/assets/lmasset.ticket")),
+                       Contains(StartsWith("Big ticket response is { URL: ")),
+                       Contains("Downloaded large ticket size is 1 KB"),
+                       Contains("Domain is 127.0.0.1").Times(2))));
 }
 
 TEST_F(LargeTicket, CompletesAValidation) {
@@ -124,7 +126,8 @@ TEST_F(LargeTicket, ATemplateWithoutTheTokenIsUsedAsItIs) {
 TEST_F(LargeTicket, ATemplateThatMakesNoURLIsSaidSoAndNoTicketIsFound) {
     for (const char* text : {"not a URL", "https://", "${f}", "https://host/%zz", "https://host/a b"}) {
         deliver(assetRecord(text, 7), {});
-        EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(), "Large ticket was requested from an invalid URL: (null)",
+        EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(),
+                                                    "Large ticket was requested from an invalid URL: (null)",
                                                     noTicketLine(), stapleFailed(65))))
             << text;
     }
@@ -136,8 +139,9 @@ TEST_F(LargeTicket, OfAnotherSizeThanAnnouncedIsRefused) {
     const Response asset{.body = foundation::toString(genuine)};
     for (const std::size_t announced : {genuine.size() - 1, genuine.size() + 1, std::size_t{0}}) {
         deliver(assetRecord(service().url("/${f}"), announced), asset);
-        EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(), sizeLine(std::to_string(announced), genuine.size()),
-                                                    stapleFailed(65))));
+        EXPECT_THAT(staple(),
+                    Ended(65, ElementsAre(processing(), sizeLine(std::to_string(announced), genuine.size()),
+                                          stapleFailed(65))));
     }
     EXPECT_THAT(temporaryFiles(), IsEmpty());
 }
@@ -168,10 +172,12 @@ TEST_F(LargeTicket, AMissingAssetOfAnotherSizeIsAMatterOfSize) {
 TEST_F(LargeTicket, AnErrorOfTheAnnouncedSizeIsAMatterOfStatus) {
     deliver(assetRecord(service().url("/${f}"), genuine.size()),
             {.status = 500, .body = foundation::toString(genuine)});
-    EXPECT_THAT(staple(),
-                Ended(68, ElementsAre(processing(),
-                                      "Attempting to download larger ticket for Sample.app failed. internal server error",
-                                      stapleFailed(68))));
+    EXPECT_THAT(
+        staple(),
+        Ended(68,
+              ElementsAre(processing(),
+                          "Attempting to download larger ticket for Sample.app failed. internal server error",
+                          stapleFailed(68))));
     EXPECT_THAT(temporaryFiles(), IsEmpty());
 }
 
@@ -192,25 +198,30 @@ TEST_F(LargeTicket, OfTheRightSizeMustStillBeGenuine) {
 
 TEST_F(LargeTicket, ThatIsRevokedIsSaidSo) {
     deliver(revokedTicket());
-    EXPECT_THAT(staple(),
-                Ended(77, ElementsAre(processing(), "Could not validate ticket for " + bundle,
-                                      "The ticket for Sample.app has been revoked. Tollmark will prevent it from running.")));
+    EXPECT_THAT(
+        staple(),
+        Ended(77, ElementsAre(
+                      processing(), "Could not validate ticket for " + bundle,
+                      "The ticket for Sample.app has been revoked. Tollmark will prevent it from running.")));
 }
 
 // Where it comes from.
 
 TEST_F(LargeTicket, MayComeFromAnotherHostWithACertificateOfItsOwn) {
     HostileServer assets(identityOf(ServerChain("localhost").issue()));
-    assets.setHandler([this](const RecordedRequest&) { return Response{.body = foundation::toString(genuine)}; });
+    assets.setHandler(
+        [this](const RecordedRequest&) { return Response{.body = foundation::toString(genuine)}; });
     deliver(assetRecord(assets.url("/${f}", "localhost"), genuine.size()), {.status = 404});
-    EXPECT_THAT(pinwell({"staple", "-v", bundle}),
-                Ended(0, AllOf(Contains("Domain is 127.0.0.1"), Contains("Domain is localhost"), Contains(kWorked))));
+    EXPECT_THAT(
+        pinwell({"staple", "-v", bundle}),
+        Ended(0, AllOf(Contains("Domain is 127.0.0.1"), Contains("Domain is localhost"), Contains(kWorked))));
     EXPECT_EQ(service().requests().size(), 1U);
 }
 
 TEST_F(LargeTicket, MayBeRedirected) {
     service().enqueue(Script().respond(answer(assetRecord(service().url("/${f}"), genuine.size()))));
-    service().enqueue(Script().respond({.status = 302, .headers = {{"Location", "/there"}}, .body = "moved"}));
+    service().enqueue(
+        Script().respond({.status = 302, .headers = {{"Location", "/there"}}, .body = "moved"}));
     service().enqueue(Script().respond({.body = foundation::toString(genuine)}));
     EXPECT_THAT(staple(), Worked());
 }
@@ -219,7 +230,8 @@ TEST_F(LargeTicket, MayBeRedirected) {
 
 TEST_F(LargeTicket, AHostThatIsNotTrustedParksTheRun) {
     HostileServer stranger(identityOf(ServerChain("localhost").issue()));
-    deliver(assetRecord(stranger.url("/${f}"), genuine.size()), {});  // by its address, which it has no name for
+    deliver(assetRecord(stranger.url("/${f}"), genuine.size()),
+            {});  // by its address, which it has no name for
     expectParked(DownloadFailed());
     EXPECT_THAT(stranger.requests(), IsEmpty());
 }
@@ -236,7 +248,8 @@ TEST_F(LargeTicket, AHostThatDoesNotAnswerParksTheRun) {
 
 TEST_F(LargeTicket, AConnectionThatIsCutParksTheRun) {
     service().enqueue(Script().respond(answer(assetRecord(service().url("/${f}"), genuine.size()))));
-    service().enqueue(Script().readRequest().send("HTTP/1.1 200 OK\r\nContent-Length: 1000\r\n\r\nabc").cut());
+    service().enqueue(
+        Script().readRequest().send("HTTP/1.1 200 OK\r\nContent-Length: 1000\r\n\r\nabc").cut());
     expectParked(DownloadFailed());
     EXPECT_THAT(temporaryFiles(), IsEmpty());
 }
@@ -250,7 +263,8 @@ TEST_F(LargeTicket, AnAssetThatIsNotServedOverHTTPSParksTheRun) {
 
 TEST_F(LargeTicket, AnAssetBeyondMeasureParksTheRun) {
     service().enqueue(Script().respond(answer(assetRecord(service().url("/${f}"), 68719476736))));
-    service().enqueue(Script().readRequest().send("HTTP/1.1 200 OK\r\nContent-Length: 68719476736\r\n\r\n").drain());
+    service().enqueue(
+        Script().readRequest().send("HTTP/1.1 200 OK\r\nContent-Length: 68719476736\r\n\r\n").drain());
     expectParked(DownloadFailed());
 }
 

@@ -23,7 +23,8 @@ class Streams : public EndToEndTest {
         EXPECT_THAT(temporaryFiles(), ElementsAre("REQUEST.ticket"));
         EXPECT_EQ(readFile(temporaryPath("REQUEST.ticket")), foundation::toString(genuine));
         ASSERT_EQ(service().requests().size(), 1U);
-        EXPECT_EQ(service().requests()[0].body, R"({"records":[{"recordName":")" + ("2/" + prettyHash()) + R"("}]})");
+        EXPECT_EQ(service().requests()[0].body,
+                  R"({"records":[{"recordName":")" + ("2/" + prettyHash()) + R"("}]})");
     }
     /// As talkative as it gets.
     Command verboseStaple() const { return command({"staple", "-v", bundle}); }
@@ -91,8 +92,8 @@ TEST_F(Streams, AValidationOnAClosedOutputChangesNothing) {
 
 TEST_F(Streams, ALargeTicketOnAClosedOutputIsWhole) {
     const std::string url = service().url("/${f}");
-    const std::string record = R"({"records":[{"fields":{"signedTicketAsset":{"value":{"downloadURL":")" + url +
-                               R"(","size":)" + std::to_string(genuine.size()) + "}}}}]}";
+    const std::string record = R"({"records":[{"fields":{"signedTicketAsset":{"value":{"downloadURL":")" +
+                               url + R"(","size":)" + std::to_string(genuine.size()) + "}}}}]}";
     service().setHandler([this, record](const RecordedRequest& request) {
         return request.method == "POST" ? answer(record) : Response{.body = foundation::toString(genuine)};
     });

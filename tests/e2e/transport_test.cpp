@@ -1,5 +1,5 @@
-// What can go wrong between the tool and the record service: connections that break off, answers without measure,
-// redirects.
+// What can go wrong between the tool and the record service: connections that break off, answers without
+// measure, redirects.
 #include "fixture.h"
 #include "foundation/format.h"
 
@@ -56,8 +56,9 @@ TEST_F(Transport, NobodyListens) {
 }
 
 TEST_F(Transport, TheServerClosesAtOnce) {
-    EXPECT_THAT(stapleFrom(Script().reset()), AllOf(testing::Field(&ProcessResult::exitStatus, 68),
-                                                    testing::Field(&ProcessResult::output, HasSubstr(stapleFailed(68)))));
+    EXPECT_THAT(stapleFrom(Script().reset()),
+                AllOf(testing::Field(&ProcessResult::exitStatus, 68),
+                      testing::Field(&ProcessResult::output, HasSubstr(stapleFailed(68)))));
 }
 
 TEST_F(Transport, TheServerDoesNotSpeakTLS) {
@@ -86,8 +87,9 @@ TEST_F(Transport, CutInTheHead) {
 }
 
 TEST_F(Transport, CutInTheBody) {
-    EXPECT_THAT(stapleFrom(Script().readRequest().send(head + "\r\n" + body.substr(0, body.size() - 1)).cut()),
-                FailedOnTheWay(kConnectionLost));
+    EXPECT_THAT(
+        stapleFrom(Script().readRequest().send(head + "\r\n" + body.substr(0, body.size() - 1)).cut()),
+        FailedOnTheWay(kConnectionLost));
     EXPECT_THAT(stapleFrom(Script().readRequest().send(head + "\r\n" + body.substr(0, 10)).close()),
                 FailedOnTheWay(kConnectionLost));
 }
@@ -131,10 +133,11 @@ TEST_F(Transport, AnAnswerWhoseLastChunkIsMissingIsNone) {
 }
 
 TEST_F(Transport, AnInformationalAnswerComesBeforeTheAnswer) {
-    EXPECT_THAT(stapleFrom(Script().readRequest().send("HTTP/1.1 103 Early Hints\r\nX-Ostrel-Request-UUID: EARLY\r\n"
-                                                       "\r\n" +
-                                                       answer(body).bytes())),
-                Worked());
+    EXPECT_THAT(
+        stapleFrom(Script().readRequest().send("HTTP/1.1 103 Early Hints\r\nX-Ostrel-Request-UUID: EARLY\r\n"
+                                               "\r\n" +
+                                               answer(body).bytes())),
+        Worked());
     EXPECT_THAT(temporaryFiles(), ElementsAre("REQUEST.ticket"));
 }
 
@@ -145,24 +148,31 @@ TEST_F(Transport, AnEmptyBodyIsInconsistentWhateverItsStatus) {
         Response empty = answer("");
         empty.status = status;
         serve(empty);
-        EXPECT_THAT(staple(), Ended(68, ElementsAre(processing(),
-                                                    AllOf(StartsWith("Lumora's response is inconsistent with expections: "),
-                                                          HasSubstr("Status Code: " + std::to_string(status))),
-                                                    stapleFailed(68))))
+        EXPECT_THAT(
+            staple(),
+            Ended(68, ElementsAre(processing(),
+                                  AllOf(StartsWith("Lumora's response is inconsistent with expections: "),
+                                        HasSubstr("Status Code: " + std::to_string(status))),
+                                  stapleFailed(68))))
             << status;
     }
 }
 
 TEST_F(Transport, NoContentIsInconsistent) {
-    EXPECT_THAT(stapleFrom(Script().readRequest().send("HTTP/1.1 204 No Content\r\n\r\n").close()),
-                Ended(68, ElementsAre(processing(),
-                                      StartsWith("Lumora's response is inconsistent with expections: { URL: https://"),
-                                      stapleFailed(68))));
+    EXPECT_THAT(
+        stapleFrom(Script().readRequest().send("HTTP/1.1 204 No Content\r\n\r\n").close()),
+        Ended(68,
+              ElementsAre(processing(),
+                          StartsWith("Lumora's response is inconsistent with expections: { URL: https://"),
+                          stapleFailed(68))));
 }
 
 TEST_F(Transport, HeadersCannotDriveTheTerminal) {
     const ProcessResult result =
-        stapleFrom(Script().readRequest().send("HTTP/1.1 200 OK\r\nX-A: a\x1b[2Jb\r\nContent-Length: 0\r\n\r\n").close());
+        stapleFrom(Script()
+                       .readRequest()
+                       .send("HTTP/1.1 200 OK\r\nX-A: a\x1b[2Jb\r\nContent-Length: 0\r\n\r\n")
+                       .close());
     EXPECT_EQ(result.exitStatus, 68);
     EXPECT_THAT(result.output, testing::Not(HasSubstr("\x1b")));
 }
@@ -170,8 +180,8 @@ TEST_F(Transport, HeadersCannotDriveTheTerminal) {
 TEST_F(Transport, AnAnswerThatAnnouncesMoreThanIsReadIsRefusedBeforeItComes) {
     EXPECT_THAT(stapleFrom(Script()
                                .readRequest()
-                               .send("HTTP/1.1 200 OK\r\nContent-Length: " + std::to_string(64 * kMebibyte + 1) +
-                                     "\r\n\r\n")
+                               .send("HTTP/1.1 200 OK\r\nContent-Length: " +
+                                     std::to_string(64 * kMebibyte + 1) + "\r\n\r\n")
                                .drain()),
                 FailedOnTheWay(kTooLarge));
 }
@@ -195,7 +205,8 @@ TEST_F(Transport, AHeadWithoutEndIsRefused) {
 // Redirects.
 
 TEST_F(Transport, ARedirectIsFollowedAndItsAnswerIsTheAnswer) {
-    service().enqueue(Script().respond({.status = 307, .headers = {{"Location", "/elsewhere"}}, .body = "moved"}));
+    service().enqueue(
+        Script().respond({.status = 307, .headers = {{"Location", "/elsewhere"}}, .body = "moved"}));
     service().enqueue(Script().respond(answer(body)));
     EXPECT_THAT(staple(), Worked());
     const auto requests = service().requests();
@@ -206,7 +217,8 @@ TEST_F(Transport, ARedirectIsFollowedAndItsAnswerIsTheAnswer) {
 TEST_F(Transport, ARedirectMayLeadToAnotherHost) {
     HostileServer other(identityOf(ServerChain("localhost").issue()));  // of the same root
     other.setHandler([this](const RecordedRequest&) { return answer(body); });
-    service().enqueue(Script().respond({.status = 302, .headers = {{"Location", other.url("/there", "localhost")}}}));
+    service().enqueue(
+        Script().respond({.status = 302, .headers = {{"Location", other.url("/there", "localhost")}}}));
     EXPECT_THAT(staple(), Worked());
     EXPECT_EQ(other.requests().at(0).method, "GET");
 }
@@ -233,7 +245,8 @@ TEST_F(Transport, TemporaryAndPermanentRedirectsKeepThePost) {
 }
 
 TEST_F(Transport, ARedirectToAnythingButHTTPSIsRefused) {
-    for (const char* target : {"http://127.0.0.1/", "ftp://127.0.0.1/", "file:///etc/passwd", "javascript:1"}) {
+    for (const char* target :
+         {"http://127.0.0.1/", "ftp://127.0.0.1/", "file:///etc/passwd", "javascript:1"}) {
         service().enqueue(Script().respond({.status = 302, .headers = {{"Location", target}}, .body = body}));
         EXPECT_THAT(staple(), FailedOnTheWay(kUnsupportedURL)) << target;
     }
@@ -241,7 +254,8 @@ TEST_F(Transport, ARedirectToAnythingButHTTPSIsRefused) {
 
 TEST_F(Transport, AnyOtherRedirectIsRefused) {
     for (const int status : {300, 305, 306}) {
-        service().enqueue(Script().respond({.status = status, .headers = {{"Location", "/there"}}, .body = body}));
+        service().enqueue(
+            Script().respond({.status = status, .headers = {{"Location", "/there"}}, .body = body}));
         EXPECT_THAT(staple(), FailedOnTheWay(kUnsupportedURL)) << status;
     }
 }

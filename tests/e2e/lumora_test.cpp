@@ -1,0 +1,198 @@
+// The tool against the real record service: what a user does from the first sample to a revocation.
+#include <csignal>
+#include <filesystem>
+
+#include "fixture.h"
+
+namespace pinwell::test {
+namespace {
+
+using testing::AllOf;
+using testing::Contains;
+using testing::ElementsAre;
+using testing::HasSubstr;
+using testing::StartsWith;
+
+constexpr const char* kStapled = "The staple and validate action worked!";
+constexpr const char* kValidated = "The validate action worked!";
+
+class LocalService : public EndToEndTest {
+  protected:
+    LocalService() {
+        const ProcessResult sample = lumora({"sample", directory / "samples"});
+        const ProcessResult init = lumora({"init", serviceDirectory, "--host", "127.0.0.1"});
+        if (sample.exitStatus != 0 || init.exitStatus != 0)
+            throw std::runtime_error(sample.errors + init.errors);
+        bundle = linesOf(sample.output).at(0);
+        environment["PINWELL_PLATFORM"] = serviceDirectory + "/platform";
+    }
+
+    ProcessResult lumora(std::vector<std::string> arguments) const {
+        return runProcess(lumoraCommand(std::move(arguments)));
+    }
+    Command lumoraCommand(std::vector<std::string> arguments) const {
+        Command command = this->command(std::move(arguments));
+        command.executable = LUMORA_LOCAL_PROGRAM;
+        return command;
+    }
+    /// A command on the service's records that must work.
+    void record(const std::string& verb, std::vector<std::string> arguments) const {
+        arguments.insert(arguments.begin(), {verb, serviceDirectory});
+        const ProcessResult result = lumora(std::move(arguments));
+        ASSERT_EQ(result.exitStatus, 0) << result.errors;
+    }
+    /// Starts it on a free port and points the platform directory at it.
+    void serveRecords() {
+        serving = std::make_unique<RunningProcess>(
+            lumoraCommand({"serve", serviceDirectory, "--listen", "127.0.0.1:0", "--update-platform"}));
+        const auto ready = serving->waitForLine("ready at https://127.0.0.1:");
+        if (!ready) throw std::runtime_error("lumora-local did not start: " + serving->resultSoFar().errors);
+    }
+    ProcessResult stapleAt(const std::string& path) const { return pinwell({"staple", path}); }
+
+    testing::Matcher<const ProcessResult&> Stapled() const {
+        return Ended(0, ElementsAre(processing(), processing(), kStapled));
+    }
+    testing::Matcher<const ProcessResult&> Validated() const {
+        return Ended(0, ElementsAre(processing(), kValidated));
+    }
+    testing::Matcher<const ProcessResult&> RefusedAsRevoked() const {
+        return Ended(
+            77, ElementsAre(
+                    processing(), "Could not validate ticket for " + bundle,
+                    "The ticket for Sample.app has been revoked. Tollmark will prevent it from running."));
+    }
+    /// For a bundle whose hash this test need not know.
+    testing::Matcher<const ProcessResult&> NotFound(const std::string& path) const {
+        return Ended(65, ElementsAre("Processing: " + path,
+                                     AllOf(StartsWith("Lumora query for "),
+                                           testing::EndsWith("failed due to \"Record not found\".")),
+                                     StartsWith("Could not find base64 encoded ticket in response for 2/"),
+                                     stapleFailed(65)));
+    }
+
+    const std::string serviceDirectory = directory / "service";
+    std::unique_ptr<RunningProcess> serving;
+};
+
+TEST_F(LocalService, FromASampleToItsRevocation) {
+    record("issue", {bundle});
+    serveRecords();
+    EXPECT_THAT(validate(),
+                Ended(65, ElementsAre(processing(), "Sample.app does not have a ticket stapled to it.")));
+    EXPECT_THAT(staple(), Stapled());
+    EXPECT_THAT(validate(), Validated());
+    EXPECT_THAT(staple(), Stapled());
+    record("revoke", {bundle});
+    const auto kept = stapled();
+    EXPECT_THAT(validate(), RefusedAsRevoked());
+    EXPECT_THAT(staple(), RefusedAsRevoked());
+    EXPECT_EQ(stapled(), kept);
+}
+
+TEST_F(LocalService, ARevokedArtefactCanBeIssuedATicketAgain) {
+    serveRecords();
+    record("issue", {bundle});
+    record("revoke", {bundle});
+    EXPECT_THAT(staple(), RefusedAsRevoked());
+    record("issue", {bundle});
+    EXPECT_THAT(staple(), Stapled());
+    EXPECT_THAT(validate(), Validated());
+}
+
+TEST_F(LocalService, DeliversTicketsAsAssets) {
+    record("issue", {bundle, "--asset"});
+    serveRecords();
+    EXPECT_THAT(
+        pinwell({"staple", "-v", bundle}),
+        Ended(0, AllOf(Contains(AllOf(StartsWith("URL of large ticket asset: https://127.0.0.1:"),
+                                      HasSubstr("lmasset.ticket"))),
+                       Contains(StartsWith("Downloaded large ticket size is ")), Contains(kStapled))));
+    EXPECT_THAT(validate(), Validated());
+    record("revoke", {bundle});
+    EXPECT_THAT(validate(), RefusedAsRevoked());
+}
+
+TEST_F(LocalService, KnowsNothingOfWhatWasNotIssued) {
+    serveRecords();
+    EXPECT_THAT(staple(), NotFound(bundle));
+    EXPECT_EQ(stapled(), std::nullopt);
+}
+
+TEST_F(LocalService, IssuesForSeveralArtefactsAtOnce) {
+    std::vector<std::string> bundles{bundle};
+    for (const char* identifier : {"com.example.one", "com.example.two"}) {
+        const Data directoryBlob =
+            CodeDirectoryBuilder().identifier(identifier).covers(2, emptyRequirements()).build();
+        bundles.push_back(directory / ("work/" + std::string(identifier) + ".app"));
+        BundleBuilder()
+            .executable(
+                ExecutableImageBuilder().signature(SuperBlobBuilder::adHoc(directoryBlob).build()).build())
+            .write(bundles.back());
+    }
+    record("issue", bundles);
+    serveRecords();
+    for (const std::string& path : bundles)
+        EXPECT_THAT(stapleAt(path),
+                    Ended(0, ElementsAre("Processing: " + path, "Processing: " + path, kStapled)));
+    // Each has its own: one of another's is refused.
+    std::filesystem::copy_file(bundles[1] + "/Contents/CodeResources", bundles[2] + "/Contents/CodeResources",
+                               std::filesystem::copy_options::overwrite_existing);
+    EXPECT_THAT(pinwell({"validate", bundles[2]}), Ended(65, ElementsAre("Processing: " + bundles[2])));
+    record("revoke", {bundles[1]});
+    EXPECT_EQ(pinwell({"validate", bundles[1]}).exitStatus, 77);
+    EXPECT_THAT(validate(), Validated());
+}
+
+TEST_F(LocalService, IssuesForAPlainExecutableThatHasNoPlaceForTheTicket) {
+    const std::string tool = directory / "work/tool";
+    std::filesystem::copy_file(bundle + "/Contents/Programs/Sample", tool);
+    record("issue", {bundle});
+    serveRecords();
+    EXPECT_THAT(stapleAt(tool), Ended(73, ElementsAre("Processing: " + tool, stapleFailed(73))));
+}
+
+TEST_F(LocalService, KeepsItsEnvironmentsApart) {
+    record("issue", {bundle, "--environment", "development"});
+    serveRecords();
+    EXPECT_THAT(staple(), NotFound(bundle));
+    writeFile(serviceDirectory + "/platform/internal-security-policies", std::string_view());
+    writeFile(directory / "home/config/com.ostrel.tm.pinwell.json",
+              std::string_view(R"({"lm-production":false})"));
+    EXPECT_THAT(staple(), Stapled());
+}
+
+TEST_F(LocalService, IsNotTrustedByAnotherPlatform) {
+    record("issue", {bundle});
+    serveRecords();
+    std::filesystem::remove_all(serviceDirectory + "/platform/roots");
+    EXPECT_THAT(staple(), Ended(68, Contains("Could not establish secure connection to 127.0.0.1")));
+}
+
+TEST_F(LocalService, ThatHasStoppedCannotBeReached) {
+    record("issue", {bundle});
+    serveRecords();
+    EXPECT_THAT(staple(), Stapled());
+    serving->sendSignal(SIGTERM);
+    const ProcessResult stopped = serving->wait();
+    EXPECT_EQ(stopped.exitStatus, 0);
+    EXPECT_EQ(stopped.errors, "");
+    EXPECT_THAT(stopped.outputLines(), Contains("stopped"));
+    EXPECT_THAT(validate(), Ended(68, ElementsAre(processing(),
+                                                  StartsWith("error is Error Domain=URLErrorDomain Code=4 "),
+                                                  "Lumora's response is inconsistent with expections: (null)",
+                                                  validateFailed(68))));
+}
+
+TEST_F(LocalService, ServesManyRunsAtOnce) {
+    record("issue", {bundle});
+    serveRecords();
+    ASSERT_THAT(staple(), Stapled());
+    std::vector<std::unique_ptr<RunningProcess>> runs;
+    for (int i = 0; i < 8; ++i)
+        runs.push_back(std::make_unique<RunningProcess>(command({"validate", bundle})));
+    for (const auto& run : runs) EXPECT_THAT(run->wait(), Validated());
+}
+
+}  // namespace
+}  // namespace pinwell::test
