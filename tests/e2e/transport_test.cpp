@@ -141,7 +141,47 @@ TEST_F(Transport, AnInformationalAnswerComesBeforeTheAnswer) {
     EXPECT_THAT(temporaryFiles(), ElementsAre("REQUEST.ticket"));
 }
 
+TEST_F(Transport, AServerThatChoosesAProtocolItDoesNotSpeak) {
+    trust(serverChain.root);
+    startService(identityOf(serverChain), "127.0.0.1", {.applicationProtocol = "h2"});
+    serveTicket(ticket());
+    EXPECT_EQ(staple().exitStatus, 68);
+    EXPECT_EQ(stapled(), std::nullopt);
+}
+
+TEST_F(Transport, AProxyThatCannotBeReachedFailsTheLookup) {
+    serveTicket(ticket());
+    for (const char* variable : {"https_proxy", "all_proxy"}) {
+        environment[variable] = "http://127.0.0.1:1";
+        EXPECT_THAT(staple(), FailedOnTheWay(kCannotConnect)) << variable;
+        environment.erase(variable);
+    }
+    EXPECT_THAT(service().connections(), IsEmpty());
+}
+
+TEST_F(Transport, AHostThatTheProxyIsNotForIsReachedWithoutIt) {
+    serveTicket(ticket());
+    environment["https_proxy"] = "http://127.0.0.1:1";
+    environment["no_proxy"] = "127.0.0.1";
+    EXPECT_THAT(staple(), Worked());
+}
+
+TEST_F(Transport, ProxiesForOtherProtocolsAreNotUsed) {
+    serveTicket(ticket());
+    environment["http_proxy"] = "http://127.0.0.1:1";
+    EXPECT_THAT(staple(), Worked());
+}
+
 // Answers.
+
+TEST_F(Transport, AQuestionForAPasswordIsAnAnswerLikeAnyOther) {
+    Response question = answer(body);
+    question.status = 401;
+    question.headers.emplace_back("WWW-Authenticate", "Basic realm=\"records\"");
+    serve(question);
+    EXPECT_THAT(staple(), Worked());
+    EXPECT_EQ(service().requests().size(), 1U);
+}
 
 TEST_F(Transport, AnEmptyBodyIsInconsistentWhateverItsStatus) {
     for (const int status : {200, 404, 500}) {
