@@ -1,0 +1,93 @@
+// Times two commands against each other in one run: compare_commands RUNS LIMIT COMMAND... -- PEER...
+//
+// The two are run by turns, so that whatever else the machine does weighs on both alike. Prints the median wall time of
+// each and their ratio. Exits with 1 when the ratio is above LIMIT, 0 otherwise, and with 70 when a command could not
+// be run or ended otherwise than its first run did.
+#include <fcntl.h>
+#include <spawn.h>
+#include <sys/wait.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <string_view>
+#include <vector>
+
+extern char** environ;
+
+namespace {
+
+using Clock = std::chrono::steady_clock;
+using Milliseconds = std::chrono::duration<double, std::milli>;
+
+constexpr int kWarmUps = 3;
+constexpr int kExitSlower = 1;
+constexpr int kExitUsage = 64;
+constexpr int kExitSoftware = 70;
+
+class Contender {
+  public:
+    // `arguments` ends with a null pointer.
+    explicit Contender(char** arguments) : arguments_(arguments) {}
+
+    void run(bool counts) {
+        posix_spawn_file_actions_t actions;
+        posix_spawn_file_actions_init(&actions);
+        for (const int stream : {0, 1, 2}) posix_spawn_file_actions_addopen(&actions, stream, "/dev/null", O_RDWR, 0);
+        const auto start = Clock::now();
+        pid_t process = 0;
+        const int failure = posix_spawnp(&process, arguments_[0], &actions, nullptr, arguments_, environ);
+        posix_spawn_file_actions_destroy(&actions);
+        if (failure != 0) giveUp(std::strerror(failure));
+        int status = 0;
+        while (waitpid(process, &status, 0) < 0 && errno == EINTR) {
+        }
+        const Milliseconds took = Clock::now() - start;
+        if (firstStatus_ < 0) firstStatus_ = status;
+        if (status != firstStatus_) giveUp("ended otherwise than before");
+        if (counts) times_.push_back(took.count());
+    }
+
+    double median() {
+        std::sort(times_.begin(), times_.end());
+        return times_[times_.size() / 2];
+    }
+
+
+  private:
+    [[noreturn]] void giveUp(const char* why) const {
+        std::fprintf(stderr, "compare_commands: %s: %s\n", arguments_[0], why);
+        std::exit(kExitSoftware);
+    }
+
+    char** arguments_;
+    int firstStatus_ = -1;
+    std::vector<double> times_;
+};
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    char** separator = std::find_if(argv, argv + argc, [](const char* word) { return std::string_view(word) == "--"; });
+    const auto words = separator - argv;
+    if (words < 4 || words + 1 >= argc) {
+        std::fprintf(stderr, "usage: compare_commands RUNS LIMIT COMMAND... -- PEER...\n");
+        return kExitUsage;
+    }
+    const int runs = std::max(1, std::atoi(argv[1]));
+    const double limit = std::strtod(argv[2], nullptr);
+    *separator = nullptr;
+
+    Contender ours(argv + 3);
+    Contender peer(separator + 1);
+    for (int i = -kWarmUps; i < runs; ++i) {
+        ours.run(i >= 0);
+        peer.run(i >= 0);
+    }
+    const double ratio = ours.median() / peer.median();
+    std::printf("%.2f ms against %.2f ms: ratio %.2f (limit %.2f)\n", ours.median(), peer.median(), ratio, limit);
+    return ratio > limit ? kExitSlower : 0;
+}
