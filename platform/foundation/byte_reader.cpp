@@ -41,12 +41,12 @@ std::uint32_t ByteReader::le32(std::string_view what) { return static_cast<std::
 std::uint64_t ByteReader::le64(std::string_view what) { return littleEndian(8, what); }
 
 void ByteReader::seek(std::uint64_t position, std::string_view what) {
-    if (position > bytes_.size()) throw ShortRead(what, base_ + bytes_.size(), position, bytes_.size());
+    if (position > bytes_.size()) throw ShortRead(what, base_, position, bytes_.size());
     position_ = static_cast<std::size_t>(position);
 }
 
 ByteReader ByteReader::sub(std::uint64_t offset, std::uint64_t length, std::string_view what) const {
-    if (offset > bytes_.size()) throw ShortRead(what, base_ + bytes_.size(), length, 0);
+    if (offset > bytes_.size()) throw ShortRead(what, base_, offset, bytes_.size());
     const std::size_t start = static_cast<std::size_t>(offset);
     const std::size_t available = bytes_.size() - start;
     if (length > available) throw ShortRead(what, base_ + start, length, available);

@@ -19,7 +19,7 @@ class ShortRead : public std::runtime_error {
   public:
     ShortRead(std::string_view what, std::size_t offset, std::size_t wanted, std::size_t remaining);
 
-    /// Where in the outermost buffer the read began.
+    /// Where in the outermost buffer the read began; for a position outside the reader's bytes, where those begin.
     std::size_t offset() const noexcept { return offset_; }
 
   private:

@@ -39,6 +39,7 @@ inline std::string toString(ByteView bytes) {
 /// Two lower-case hexadecimal digits a byte, no separators.
 std::string toHex(ByteView bytes);
 
+/// `bytes` must not lie in `data` itself, which may move.
 inline void append(Data& data, ByteView bytes) { data.insert(data.end(), bytes.begin(), bytes.end()); }
 
 }  // namespace pinwell::foundation

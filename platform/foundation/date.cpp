@@ -3,7 +3,6 @@
 #include <fmt/chrono.h>
 
 #include <chrono>
-#include <limits>
 
 namespace pinwell::foundation {
 namespace {

@@ -15,12 +15,7 @@ constexpr std::size_t kExcerptHead = 16;
 constexpr std::size_t kExcerptTail = 4;
 
 constexpr unsigned kIndentStep = 4;
-
-bool isControl(std::string_view sequence) {
-    const auto first = static_cast<unsigned char>(sequence[0]);
-    if (sequence.size() == 1) return first < 0x20 || first == 0x7F;
-    return sequence.size() == 2 && first == 0xC2 && static_cast<unsigned char>(sequence[1]) < 0xA0;  // C1
-}
+constexpr unsigned kDeepestIndent = 16;  // deeper lines stand no further in
 
 void appendEscaped(std::string& out, std::string_view bytes) {
     if (bytes == "\n") out += "\\n";
@@ -36,7 +31,7 @@ std::string escape(std::string_view text, std::string_view alsoEscaped) {
     while (!text.empty()) {
         const std::size_t length = utf8SequenceLength(text);
         const std::string_view sequence = text.substr(0, std::max<std::size_t>(length, 1));
-        if (length == 0 || isControl(sequence)) {
+        if (length == 0 || isControlCharacter(sequence)) {
             appendEscaped(out, sequence);
         } else {
             if (alsoEscaped.find(sequence[0]) != std::string_view::npos) out += '\\';
@@ -47,7 +42,46 @@ std::string escape(std::string_view text, std::string_view alsoEscaped) {
     return out;
 }
 
-std::string indentation(unsigned indent) { return std::string(std::size_t{indent} * kIndentStep, ' '); }
+void appendLineStart(std::string& out, unsigned indent) {
+    out.append(std::size_t{std::min(indent, kDeepestIndent)} * kIndentStep, ' ');
+}
+
+std::string decimal(double number) { return fmt::format("{}", number); }
+
+// Containers are written into one text, not joined from their elements' texts, and indented only so far: what a
+// document nested hundreds of levels deep comes to would otherwise grow with length times depth.
+void append(std::string& out, const Array& array, unsigned indent);
+void append(std::string& out, const Dictionary& dictionary, unsigned indent);
+
+void append(std::string& out, const Value& value, unsigned indent) {
+    if (value.array() != nullptr) append(out, *value.array(), indent);
+    else if (value.dictionary() != nullptr) append(out, *value.dictionary(), indent);
+    else out += value.describe(indent);
+}
+
+void append(std::string& out, const Array& array, unsigned indent) {
+    out += "(\n";
+    std::size_t left = array.size();
+    for (const Value& element : array) {
+        appendLineStart(out, indent + 1);
+        append(out, element, indent + 1);
+        out += --left > 0 ? ",\n" : "\n";
+    }
+    appendLineStart(out, indent);
+    out += ')';
+}
+
+void append(std::string& out, const Dictionary& dictionary, unsigned indent) {
+    out += "{\n";
+    for (const auto& [key, value] : dictionary) {
+        appendLineStart(out, indent + 1);
+        out += quoteForPropertyList(key) + " = ";
+        append(out, value, indent + 1);
+        out += ";\n";
+    }
+    appendLineStart(out, indent);
+    out += '}';
+}
 
 std::string hexWords(ByteView bytes) {
     std::string text;
@@ -87,25 +121,33 @@ std::string describe(const Error& error) {
     for (const auto& [key, value] : error.userInfo()) {
         if (!first) text += ", ";
         first = false;
-        text += escapeForTerminal(key) + "=" + Description<Value>::of(value);
+        text += escapeForTerminal(key) + "=";
+        // In braces, not in quotes: a chain of errors would double its backslashes at every link.
+        text += value.error() != nullptr ? "{" + describe(*value.error()) + "}" : describe(value);
     }
     return text + "}";
 }
 
+std::string describe(const Value& value) {
+    if (value.string() != nullptr) return escapeForTerminal(*value.string());
+    if (value.isNull()) return "<null>";
+    if (value.date() != nullptr) return toString(*value.date());
+    if (value.url() != nullptr) return Description<URL>::of(*value.url());
+    if (value.error() != nullptr) return describe(*value.error());
+    if (value.real() != nullptr) return decimal(*value.real());
+    return value.describe(0);
+}
+
 std::string describe(const Array& array, unsigned indent) {
-    std::string text = "(\n";
-    for (std::size_t i = 0; i < array.size(); ++i) {
-        text += indentation(indent + 1) + array[i].describe(indent + 1);
-        text += i + 1 < array.size() ? ",\n" : "\n";
-    }
-    return text + indentation(indent) + ")";
+    std::string text;
+    append(text, array, indent);
+    return text;
 }
 
 std::string describe(const Dictionary& dictionary, unsigned indent) {
-    std::string text = "{\n";
-    for (const auto& [key, value] : dictionary)
-        text += indentation(indent + 1) + quoteForPropertyList(key) + " = " + value.describe(indent + 1) + ";\n";
-    return text + indentation(indent) + "}";
+    std::string text;
+    append(text, dictionary, indent);
+    return text;
 }
 
 std::string Description<Value>::of(const Value& value) {
@@ -125,10 +167,7 @@ std::string Value::describe(unsigned indent) const {
         std::string operator()(bool flag) const { return flag ? "1" : "0"; }
         std::string operator()(std::int64_t number) const { return fmt::format("{}", number); }
         std::string operator()(std::uint64_t number) const { return fmt::format("{}", number); }
-        std::string operator()(double number) const {
-            const std::string text = fmt::format("{}", number);
-            return text.find_first_of(".+") == std::string::npos ? text : quoteForPropertyList(text);
-        }
+        std::string operator()(double number) const { return quoteForPropertyList(decimal(number)); }
         std::string operator()(const std::string& text) const { return quoteForPropertyList(text); }
         std::string operator()(Date date) const { return quoteForPropertyList(toString(date)); }
         std::string operator()(const std::shared_ptr<const Data>& data) const {

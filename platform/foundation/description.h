@@ -1,6 +1,6 @@
 // What "%@" prints: one textual description for every platform object.
 //
-//   nil                "(null)"; a JSON null "<null>"
+//   nil                (null); a JSON null <null>
 //   text               itself; control characters and bytes that are not UTF-8 as escapes, so that nothing
 //                      that came from a file or a server can drive the terminal
 //   number             decimal; booleans 1 and 0
@@ -8,15 +8,17 @@
 //   date               2026-11-20 19:55:00 +0000
 //   file URL           file:///a%20b
 //   error              Error Domain=D Code=N "text" UserInfo={...}
-//   array, dictionary  the old property-list style, keys sorted
+//   array, dictionary  the old property-list style, keys sorted; what is no single word inside is quoted
 //
 // A type of another service becomes printable by specialising Description beside its declaration.
 #pragma once
 
+#include <concepts>
 #include <memory>
 #include <optional>
 #include <string>
 #include <string_view>
+#include <type_traits>
 
 #include "foundation/bytes.h"
 #include "foundation/date.h"
@@ -40,6 +42,7 @@ std::string quoteForPropertyList(std::string_view text);
 
 std::string describe(ByteView bytes);
 std::string describe(const Error& error);
+std::string describe(const Value& value);
 std::string describe(const Array& array, unsigned indent = 0);
 std::string describe(const Dictionary& dictionary, unsigned indent = 0);
 
@@ -54,6 +57,12 @@ struct Description<std::string> {
 template <>
 struct Description<std::string_view> {
     static std::string of(std::string_view text) { return escapeForTerminal(text); }
+};
+template <>
+struct Description<char*> {
+    static std::string of(const char* text) {
+        return text == nullptr ? std::string(kNilDescription) : escapeForTerminal(text);
+    }
 };
 template <>
 struct Description<const char*> {
@@ -83,7 +92,7 @@ struct Description<Error> {
 };
 template <>
 struct Description<Value> {
-    static std::string of(const Value& value);  // as what it holds, not as a token of a property list
+    static std::string of(const Value& value) { return describe(value); }
 };
 template <>
 struct Description<Array> {

@@ -2,7 +2,7 @@
 
 #include <fmt/format.h>
 
-#include <system_error>
+#include <cstring>
 
 namespace pinwell::foundation {
 namespace {
@@ -20,8 +20,9 @@ Error::Error(std::string_view domain, std::int64_t code, std::string text, Dicti
     : domain_(domain), code_(code), text_(std::move(text)), userInfo_(std::move(userInfo)) {}
 
 Error Error::posix(int number, std::string_view path) {
-    // Not strerror: its buffer is shared between threads.
-    Error error(kPOSIXErrorDomain, number, std::generic_category().message(number));
+    // Not strerror: this one is neither translated nor shared between threads.
+    const char* text = strerrordesc_np(number);
+    Error error(kPOSIXErrorDomain, number, text == nullptr ? fmt::format("Error {}.", number) : std::string(text));
     return path.empty() ? error : std::move(error).with(kFilePathKey, path);
 }
 

@@ -71,7 +71,7 @@ std::string formatArguments(std::string_view format, std::span<const Argument> a
         const Argument& argument = arguments[next++];
         if (conversion.letter == 'c') {
             const char character = static_cast<char>(argument.integer);
-            out += escapeForTerminal({&character, 1});
+            out += formatText(specification, escapeForTerminal({&character, 1}));
         } else if (conversion.wants == ArgumentKind::object || conversion.wants == ArgumentKind::text) {
             out += formatText(specification, argument.text);
         } else {

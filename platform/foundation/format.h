@@ -4,7 +4,7 @@
 //
 // Conversions: %@ (any Describable), %d %i (integers of at most 32 bits, printed as signed), %u %x %X %o (the
 // same, as unsigned), the l, ll, z, t and j lengths (64-bit integers), hh (one byte), %c (one character), %s
-// (text; control characters escaped), %%. Flags, width and precision as in printf, but no '*'.
+// (text; control characters escaped), %%. Flags, width and precision (up to 99) as in printf, but no '*'.
 // A format that does not fit its arguments does not compile.
 #pragma once
 
@@ -32,6 +32,9 @@ struct Conversion {
 
 struct MalformedFormat {};
 
+/// Largest width and precision.
+inline constexpr std::size_t kMaximumFieldWidth = 99;
+
 constexpr bool isOneOf(char c, std::string_view set) { return set.find(c) != std::string_view::npos; }
 
 /// Reads the conversion that begins at format[start] == '%'. Throws MalformedFormat; in a constant expression
@@ -39,12 +42,21 @@ constexpr bool isOneOf(char c, std::string_view set) { return set.find(c) != std
 constexpr Conversion scanConversion(std::string_view format, std::size_t start) {
     std::size_t at = start + 1;
     const auto peek = [&] { return at < format.size() ? format[at] : '\0'; };
+    const auto number = [&] {
+        std::size_t value = 0;
+        for (; peek() >= '0' && peek() <= '9'; ++at) {
+            value = value * 10 + static_cast<std::size_t>(peek() - '0');
+            if (value > kMaximumFieldWidth) throw MalformedFormat{};
+        }
+    };
+    if (peek() == '%') return {at + 1, '%', ArgumentKind::object};
     while (peek() != '\0' && isOneOf(peek(), "-+ #0")) ++at;
-    while (peek() >= '0' && peek() <= '9') ++at;
+    number();
     if (peek() == '.') {
         ++at;
-        while (peek() >= '0' && peek() <= '9') ++at;
+        number();
     }
+    const std::size_t lengthStart = at;
     ArgumentKind integer = ArgumentKind::int32;
     if (format.substr(at).starts_with("hh")) {
         integer = ArgumentKind::int8;
@@ -57,14 +69,16 @@ constexpr Conversion scanConversion(std::string_view format, std::size_t start) 
         at += 1;
     }
     const char letter = peek();
+    const bool hasLength = at > lengthStart;
     Conversion conversion{at + 1, letter, integer};
     switch (letter) {
         case 'd': case 'i': case 'u': case 'x': case 'X': case 'o': break;
         case 'c': conversion.wants = ArgumentKind::int8; break;
         case 's': conversion.wants = ArgumentKind::text; break;
-        case '@': case '%': conversion.wants = ArgumentKind::object; break;
+        case '@': conversion.wants = ArgumentKind::object; break;
         default: throw MalformedFormat{};
     }
+    if (hasLength && isOneOf(letter, "cs@")) throw MalformedFormat{};
     return conversion;
 }
 

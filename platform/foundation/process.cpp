@@ -10,6 +10,7 @@
 #include <system_error>
 
 #include "foundation/bytes.h"
+#include "foundation/utf8.h"
 
 namespace pinwell::foundation {
 namespace {
@@ -50,10 +51,13 @@ std::optional<std::string> secureEnvironment(const char* name) {
 bool isSafeFileName(std::string_view identifier) {
     if (identifier.empty() || identifier.size() > kLongestSafeName) return false;
     if (identifier == "." || identifier == "..") return false;
-    return std::none_of(identifier.begin(), identifier.end(), [](char c) {
-        const auto byte = static_cast<unsigned char>(c);
-        return c == '/' || byte < 0x20 || byte == 0x7F;
-    });
+    if (identifier.find('/') != std::string_view::npos) return false;
+    while (!identifier.empty()) {
+        const std::string_view character = identifier.substr(0, std::max<std::size_t>(utf8SequenceLength(identifier), 1));
+        if (isControlCharacter(character)) return false;
+        identifier.remove_prefix(character.size());
+    }
+    return true;
 }
 
 }  // namespace pinwell::foundation

@@ -2,6 +2,9 @@
 
 #include <pthread.h>
 
+#include <algorithm>
+#include <utility>
+
 namespace pinwell::foundation {
 
 SerialQueue::SerialQueue(std::string name) : thread_([this] { run(); }) {
@@ -28,7 +31,7 @@ void SerialQueue::async(std::function<void()> work) {
 
 void SerialQueue::sync(const std::function<void()>& work) {
     if (isCurrent()) {
-        work();
+        [&]() noexcept { work(); }();
         return;
     }
     std::mutex mutex;
@@ -49,10 +52,11 @@ void SerialQueue::run() {
     while (true) {
         changed_.wait(lock, [this] { return stopping_ || !work_.empty(); });
         if (work_.empty()) return;
-        const auto work = std::move(work_.front());
+        auto work = std::exchange(work_.front(), nullptr);
         work_.pop_front();
         lock.unlock();
         work();
+        work = nullptr;  // what it owned goes while the queue is unlocked, and may still hand in work
         lock.lock();
     }
 }

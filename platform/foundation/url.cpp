@@ -78,8 +78,11 @@ URL URL::fileURLWithPath(std::string_view path) {
     if (path.front() == '/') {
         url.path_ = tidyPath(path);
     } else {
-        std::error_code ignored;  // a removed current directory leaves the path hanging below the root
-        url.path_ = tidyPath(std::filesystem::current_path(ignored).native() + "/" + std::string(path));
+        std::error_code failure;
+        const std::filesystem::path current = std::filesystem::current_path(failure);
+        // Without a current directory the path stays relative and leads nowhere; below the root it could lead to
+        // some other file.
+        url.path_ = failure ? std::string(path) : tidyPath(current.native() + "/" + std::string(path));
     }
     return url;
 }
@@ -133,6 +136,7 @@ std::string URL::pathExtension() const {
 URL URL::appendingPathComponent(std::string_view component) const {
     URL url = *this;
     if (isFile_) {
+        if (path_.empty()) return url;
         url.path_ = tidyPath(path_ + "/" + std::string(component));
         return url;
     }

@@ -12,7 +12,7 @@ namespace pinwell::foundation {
 /// Immutable; copies are cheap enough to pass by value.
 class URL {
   public:
-    /// A relative path is taken against the current directory. Trailing slashes, doubled slashes and "."
+    /// A relative path is taken against the current directory (left as it is when that has been removed). Trailing slashes, doubled slashes and "."
     /// components are dropped; ".." stays, since what it means depends on links. An empty path stays empty and
     /// names nothing.
     static URL fileURLWithPath(std::string_view path);
@@ -41,7 +41,10 @@ class URL {
     /// only dot begins or ends the name.
     std::string pathExtension() const;
 
+    /// A URL that names nothing stays as it is. The component is a name as the file system has it.
     URL appendingPathComponent(std::string_view component) const;
+
+    /// Of a file; another URL stays as it is.
     URL deletingLastPathComponent() const;
 
     bool operator==(const URL&) const = default;

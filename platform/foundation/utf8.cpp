@@ -36,6 +36,12 @@ std::size_t utf8SequenceLength(std::string_view text) noexcept {
     return sequence.length;
 }
 
+bool isControlCharacter(std::string_view sequence) noexcept {
+    const auto first = static_cast<unsigned char>(sequence[0]);
+    if (sequence.size() == 1) return first < 0x20 || first == 0x7F;
+    return sequence.size() == 2 && first == 0xC2 && static_cast<unsigned char>(sequence[1]) < 0xA0;
+}
+
 bool isUTF8(std::string_view text) noexcept {
     while (!text.empty()) {
         const std::size_t length = utf8SequenceLength(text);

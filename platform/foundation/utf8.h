@@ -11,4 +11,7 @@ std::size_t utf8SequenceLength(std::string_view text) noexcept;
 
 bool isUTF8(std::string_view text) noexcept;
 
+/// Whether one well-formed sequence is a control character: C0, DEL or C1.
+bool isControlCharacter(std::string_view sequence) noexcept;
+
 }  // namespace pinwell::foundation

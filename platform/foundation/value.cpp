@@ -8,7 +8,7 @@
 namespace pinwell::foundation {
 namespace {
 
-const Value kNil;
+constinit const Value kNil;
 
 template <class T, class Content>
 const T* shared(const Content& content) noexcept {

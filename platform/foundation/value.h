@@ -87,7 +87,7 @@ class Value {
     const Value& operator[](std::string_view key) const;
     const Value& operator[](std::size_t index) const;
 
-    /// As the kind's description, see description.h. For use inside descriptions.
+    /// The description as it stands inside an array or dictionary (foundation::describe gives the one by itself).
     std::string describe(unsigned indent) const;
 
     bool operator==(const Value& other) const;
