@@ -8,12 +8,12 @@ namespace pinwell::foundation {
 
 /// Path of the main executable of the directory at `path`, opened as a bundle; nothing when it has none.
 ///
-/// The property list is Contents/Info.plist, else Resources/Info.plist, else Info.plist; the executable is the one
-/// it names (CFBundleExecutable), or else the directory's own name without the extension, and must be a regular
-/// file in a direct sub-directory of Contents (found, not assumed; the first in byte order wins), or, for a bundle
-/// without Contents, in its root. Neither the executable nor that sub-directory may be a symbolic link. A directory with Versions/Current is a framework: property list in that
-/// version's Resources, executable in that version's root. A name that holds a slash or is "." or ".." names
-/// nothing.
+/// The property list is Contents/Info.plist, else Resources/Info.plist, else Info.plist; the executable is
+/// the one it names (CFBundleExecutable), or else the directory's own name without the extension, and must be
+/// a regular file in a direct sub-directory of Contents (found, not assumed; the first in byte order wins),
+/// or, for a bundle without Contents, in its root. Neither the executable nor that sub-directory may be a
+/// symbolic link. A directory with Versions/Current is a framework: property list in that version's
+/// Resources, executable in that version's root. A name that holds a slash or is "." or ".." names nothing.
 std::optional<std::string> mainExecutableOfBundle(const std::string& path);
 
 }  // namespace pinwell::foundation

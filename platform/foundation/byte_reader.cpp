@@ -18,7 +18,8 @@ ByteView ByteReader::bytes(std::uint64_t length, std::string_view what) {
 
 std::uint64_t ByteReader::bigEndian(std::size_t width, std::string_view what) {
     std::uint64_t value = 0;
-    for (const std::byte byte : bytes(width, what)) value = (value << 8U) | std::to_integer<std::uint64_t>(byte);
+    for (const std::byte byte : bytes(width, what))
+        value = (value << 8U) | std::to_integer<std::uint64_t>(byte);
     return value;
 }
 
@@ -32,13 +33,27 @@ std::uint64_t ByteReader::littleEndian(std::size_t width, std::string_view what)
     return value;
 }
 
-std::uint8_t ByteReader::u8(std::string_view what) { return static_cast<std::uint8_t>(bigEndian(1, what)); }
-std::uint16_t ByteReader::be16(std::string_view what) { return static_cast<std::uint16_t>(bigEndian(2, what)); }
-std::uint32_t ByteReader::be32(std::string_view what) { return static_cast<std::uint32_t>(bigEndian(4, what)); }
-std::uint64_t ByteReader::be64(std::string_view what) { return bigEndian(8, what); }
-std::uint16_t ByteReader::le16(std::string_view what) { return static_cast<std::uint16_t>(littleEndian(2, what)); }
-std::uint32_t ByteReader::le32(std::string_view what) { return static_cast<std::uint32_t>(littleEndian(4, what)); }
-std::uint64_t ByteReader::le64(std::string_view what) { return littleEndian(8, what); }
+std::uint8_t ByteReader::u8(std::string_view what) {
+    return static_cast<std::uint8_t>(bigEndian(1, what));
+}
+std::uint16_t ByteReader::be16(std::string_view what) {
+    return static_cast<std::uint16_t>(bigEndian(2, what));
+}
+std::uint32_t ByteReader::be32(std::string_view what) {
+    return static_cast<std::uint32_t>(bigEndian(4, what));
+}
+std::uint64_t ByteReader::be64(std::string_view what) {
+    return bigEndian(8, what);
+}
+std::uint16_t ByteReader::le16(std::string_view what) {
+    return static_cast<std::uint16_t>(littleEndian(2, what));
+}
+std::uint32_t ByteReader::le32(std::string_view what) {
+    return static_cast<std::uint32_t>(littleEndian(4, what));
+}
+std::uint64_t ByteReader::le64(std::string_view what) {
+    return littleEndian(8, what);
+}
 
 void ByteReader::seek(std::uint64_t position, std::string_view what) {
     if (position > bytes_.size()) throw ShortRead(what, base_, position, bytes_.size());

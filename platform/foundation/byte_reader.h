@@ -1,8 +1,8 @@
 // The one bounds-checked cursor over bytes that came from outside.
 //
 // Nothing else in the tree indexes raw input. Every check compares the wanted length with what remains, so no
-// sum of two numbers from a file is ever formed, and every read says what it was reading, so that a refusal can
-// name the field and its offset.
+// sum of two numbers from a file is ever formed, and every read says what it was reading, so that a refusal
+// can name the field and its offset.
 #pragma once
 
 #include <cstdint>
@@ -19,7 +19,8 @@ class ShortRead : public std::runtime_error {
   public:
     ShortRead(std::string_view what, std::size_t offset, std::size_t wanted, std::size_t remaining);
 
-    /// Where in the outermost buffer the read began; for a position outside the reader's bytes, where those begin.
+    /// Where in the outermost buffer the read began; for a position outside the reader's bytes, where those
+    /// begin.
     std::size_t offset() const noexcept { return offset_; }
 
   private:

@@ -7,7 +7,8 @@
 
 namespace pinwell::foundation {
 
-/// Builds a buffer field by field. Each call appends and answers the writer, so that a layout reads as a list.
+/// Builds a buffer field by field. Each call appends and answers the writer, so that a layout reads as a
+/// list.
 class ByteWriter {
   public:
     ByteWriter& u8(std::uint8_t value) { return bigEndian(value, 1); }

@@ -27,7 +27,9 @@ inline Data toData(std::string_view text) {
     return {view.begin(), view.end()};
 }
 
-inline Data toData(ByteView bytes) { return {bytes.begin(), bytes.end()}; }
+inline Data toData(ByteView bytes) {
+    return {bytes.begin(), bytes.end()};
+}
 
 /// The bytes as text, copied; no encoding is assumed.
 inline std::string toString(ByteView bytes) {
@@ -40,6 +42,8 @@ inline std::string toString(ByteView bytes) {
 std::string toHex(ByteView bytes);
 
 /// `bytes` must not lie in `data` itself, which may move.
-inline void append(Data& data, ByteView bytes) { data.insert(data.end(), bytes.begin(), bytes.end()); }
+inline void append(Data& data, ByteView bytes) {
+    data.insert(data.end(), bytes.begin(), bytes.end());
+}
 
 }  // namespace pinwell::foundation

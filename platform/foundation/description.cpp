@@ -18,9 +18,12 @@ constexpr unsigned kIndentStep = 4;
 constexpr unsigned kDeepestIndent = 16;  // deeper lines stand no further in
 
 void appendEscaped(std::string& out, std::string_view bytes) {
-    if (bytes == "\n") out += "\\n";
-    else if (bytes == "\r") out += "\\r";
-    else if (bytes == "\t") out += "\\t";
+    if (bytes == "\n")
+        out += "\\n";
+    else if (bytes == "\r")
+        out += "\\r";
+    else if (bytes == "\t")
+        out += "\\t";
     else
         for (const char c : bytes) out += fmt::format("\\x{:02x}", static_cast<unsigned char>(c));
 }
@@ -46,17 +49,22 @@ void appendLineStart(std::string& out, unsigned indent) {
     out.append(std::size_t{std::min(indent, kDeepestIndent)} * kIndentStep, ' ');
 }
 
-std::string decimal(double number) { return fmt::format("{}", number); }
+std::string decimal(double number) {
+    return fmt::format("{}", number);
+}
 
-// Containers are written into one text, not joined from their elements' texts, and indented only so far: what a
-// document nested hundreds of levels deep comes to would otherwise grow with length times depth.
+// Containers are written into one text, not joined from their elements' texts, and indented only so far: what
+// a document nested hundreds of levels deep comes to would otherwise grow with length times depth.
 void append(std::string& out, const Array& array, unsigned indent);
 void append(std::string& out, const Dictionary& dictionary, unsigned indent);
 
 void append(std::string& out, const Value& value, unsigned indent) {
-    if (value.array() != nullptr) append(out, *value.array(), indent);
-    else if (value.dictionary() != nullptr) append(out, *value.dictionary(), indent);
-    else out += value.describe(indent);
+    if (value.array() != nullptr)
+        append(out, *value.array(), indent);
+    else if (value.dictionary() != nullptr)
+        append(out, *value.dictionary(), indent);
+    else
+        out += value.describe(indent);
 }
 
 void append(std::string& out, const Array& array, unsigned indent) {
@@ -94,7 +102,9 @@ std::string hexWords(ByteView bytes) {
 
 }  // namespace
 
-std::string escapeForTerminal(std::string_view text) { return escape(text, {}); }
+std::string escapeForTerminal(std::string_view text) {
+    return escape(text, {});
+}
 
 std::string quoteForPropertyList(std::string_view text) {
     const auto bare = [](char c) {
@@ -107,14 +117,15 @@ std::string quoteForPropertyList(std::string_view text) {
 
 std::string describe(ByteView bytes) {
     if (bytes.empty()) return "{length = 0, bytes = 0x}";
-    if (bytes.size() <= kWholeExcerpt) return fmt::format("{{length = {}, bytes = 0x{}}}", bytes.size(), hexWords(bytes));
-    return fmt::format("{{length = {}, bytes = 0x{} ... {}}}", bytes.size(), hexWords(bytes.first(kExcerptHead)),
-                       hexWords(bytes.last(kExcerptTail)));
+    if (bytes.size() <= kWholeExcerpt)
+        return fmt::format("{{length = {}, bytes = 0x{}}}", bytes.size(), hexWords(bytes));
+    return fmt::format("{{length = {}, bytes = 0x{} ... {}}}", bytes.size(),
+                       hexWords(bytes.first(kExcerptHead)), hexWords(bytes.last(kExcerptTail)));
 }
 
 std::string describe(const Error& error) {
-    std::string text = fmt::format("Error Domain={} Code={} \"{}\"", escapeForTerminal(error.domain()), error.code(),
-                                   escape(error.localizedFailureReason(), "\"\\"));
+    std::string text = fmt::format("Error Domain={} Code={} \"{}\"", escapeForTerminal(error.domain()),
+                                   error.code(), escape(error.localizedFailureReason(), "\"\\"));
     if (error.userInfo().empty()) return text;
     text += " UserInfo={";
     bool first = true;

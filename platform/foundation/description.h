@@ -37,7 +37,8 @@ inline constexpr std::string_view kNilDescription = "(null)";
 /// The text with control characters (C0, DEL, C1) and malformed UTF-8 replaced by backslash escapes.
 std::string escapeForTerminal(std::string_view text);
 
-/// The text as a property-list token: bare when it consists of letters, digits and "._/$-" alone, else quoted.
+/// The text as a property-list token: bare when it consists of letters, digits and "._/$-" alone, else
+/// quoted.
 std::string quoteForPropertyList(std::string_view text);
 
 std::string describe(ByteView bytes);

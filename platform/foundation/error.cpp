@@ -9,8 +9,10 @@ namespace {
 
 std::string_view statusText(std::int32_t status) {
     switch (status) {
-        case kParameterError: return "A parameter was not valid.";
-        default: return {};
+        case kParameterError:
+            return "A parameter was not valid.";
+        default:
+            return {};
     }
 }
 
@@ -22,13 +24,15 @@ Error::Error(std::string_view domain, std::int64_t code, std::string text, Dicti
 Error Error::posix(int number, std::string_view path) {
     // Not strerror: this one is neither translated nor shared between threads.
     const char* text = strerrordesc_np(number);
-    Error error(kPOSIXErrorDomain, number, text == nullptr ? fmt::format("Error {}.", number) : std::string(text));
+    Error error(kPOSIXErrorDomain, number,
+                text == nullptr ? fmt::format("Error {}.", number) : std::string(text));
     return path.empty() ? error : std::move(error).with(kFilePathKey, path);
 }
 
 Error Error::osStatus(std::int32_t status) {
     const std::string_view text = statusText(status);
-    return {kOSStatusErrorDomain, status, text.empty() ? fmt::format("Status {}.", status) : std::string(text)};
+    return {kOSStatusErrorDomain, status,
+            text.empty() ? fmt::format("Status {}.", status) : std::string(text)};
 }
 
 std::string Error::localizedDescription() const {

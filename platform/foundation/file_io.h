@@ -32,9 +32,10 @@ class FileDescriptor {
     int number_ = -1;
 };
 
-/// The whole of a regular file of at most `limit` bytes. Follows symbolic links; refuses what is not a regular
-/// file without blocking on it (EINVAL; EISDIR for a directory) and a longer file (EFBIG). Memory grows with what
-/// is really read, never with what the file claims. The error is of kPOSIXErrorDomain and names the path.
+/// The whole of a regular file of at most `limit` bytes. Follows symbolic links; refuses what is not a
+/// regular file without blocking on it (EINVAL; EISDIR for a directory) and a longer file (EFBIG). Memory
+/// grows with what is really read, never with what the file claims. The error is of kPOSIXErrorDomain and
+/// names the path.
 Result<Data> readSmallFile(const std::string& path, std::size_t limit);
 
 }  // namespace pinwell::foundation

@@ -9,7 +9,8 @@ namespace {
 // Longest field that a width or precision in one of our formats can ask for.
 constexpr std::size_t kFieldSize = 128;
 
-std::string formatInteger(std::string_view specification, const Conversion& conversion, const Argument& argument) {
+std::string formatInteger(std::string_view specification, const Conversion& conversion,
+                          const Argument& argument) {
     // Rebuild the conversion for one fixed integer width, so that the promoted argument always fits it.
     std::string flags(specification.substr(0, specification.find_first_of("hlztjdiuxXoc", 1)));
     char field[kFieldSize];
@@ -37,7 +38,8 @@ std::string formatText(std::string_view specification, std::string text) {
     bool left = false;
     std::size_t width = 0;
     std::size_t at = 1;
-    for (; at < specification.size() && isOneOf(specification[at], "-+ #0"); ++at) left |= specification[at] == '-';
+    for (; at < specification.size() && isOneOf(specification[at], "-+ #0"); ++at)
+        left |= specification[at] == '-';
     for (; at < specification.size() && specification[at] >= '0' && specification[at] <= '9'; ++at)
         width = width * 10 + static_cast<std::size_t>(specification[at] - '0');
     if (at < specification.size() && specification[at] == '.') {

@@ -35,7 +35,9 @@ struct MalformedFormat {};
 /// Largest width and precision.
 inline constexpr std::size_t kMaximumFieldWidth = 99;
 
-constexpr bool isOneOf(char c, std::string_view set) { return set.find(c) != std::string_view::npos; }
+constexpr bool isOneOf(char c, std::string_view set) {
+    return set.find(c) != std::string_view::npos;
+}
 
 /// Reads the conversion that begins at format[start] == '%'. Throws MalformedFormat; in a constant expression
 /// that stops the compiler.
@@ -72,11 +74,24 @@ constexpr Conversion scanConversion(std::string_view format, std::size_t start) 
     const bool hasLength = at > lengthStart;
     Conversion conversion{at + 1, letter, integer};
     switch (letter) {
-        case 'd': case 'i': case 'u': case 'x': case 'X': case 'o': break;
-        case 'c': conversion.wants = ArgumentKind::int8; break;
-        case 's': conversion.wants = ArgumentKind::text; break;
-        case '@': conversion.wants = ArgumentKind::object; break;
-        default: throw MalformedFormat{};
+        case 'd':
+        case 'i':
+        case 'u':
+        case 'x':
+        case 'X':
+        case 'o':
+            break;
+        case 'c':
+            conversion.wants = ArgumentKind::int8;
+            break;
+        case 's':
+            conversion.wants = ArgumentKind::text;
+            break;
+        case '@':
+            conversion.wants = ArgumentKind::object;
+            break;
+        default:
+            throw MalformedFormat{};
     }
     if (hasLength && isOneOf(letter, "cs@")) throw MalformedFormat{};
     return conversion;
@@ -86,11 +101,16 @@ template <class T>
 constexpr bool fits(ArgumentKind wants) {
     using U = std::decay_t<const T>;
     switch (wants) {
-        case ArgumentKind::object: return Describable<U>;
-        case ArgumentKind::int8: return std::is_integral_v<U> && sizeof(U) == 1;
-        case ArgumentKind::int32: return std::is_integral_v<U> && sizeof(U) <= 4;
-        case ArgumentKind::int64: return std::is_integral_v<U> && sizeof(U) == 8;
-        case ArgumentKind::text: return std::is_convertible_v<const U&, std::string_view>;
+        case ArgumentKind::object:
+            return Describable<U>;
+        case ArgumentKind::int8:
+            return std::is_integral_v<U> && sizeof(U) == 1;
+        case ArgumentKind::int32:
+            return std::is_integral_v<U> && sizeof(U) <= 4;
+        case ArgumentKind::int64:
+            return std::is_integral_v<U> && sizeof(U) == 8;
+        case ArgumentKind::text:
+            return std::is_convertible_v<const U&, std::string_view>;
     }
     return false;
 }

@@ -53,7 +53,8 @@ bool isSafeFileName(std::string_view identifier) {
     if (identifier == "." || identifier == "..") return false;
     if (identifier.find('/') != std::string_view::npos) return false;
     while (!identifier.empty()) {
-        const std::string_view character = identifier.substr(0, std::max<std::size_t>(utf8SequenceLength(identifier), 1));
+        const std::string_view character =
+            identifier.substr(0, std::max<std::size_t>(utf8SequenceLength(identifier), 1));
         if (isControlCharacter(character)) return false;
         identifier.remove_prefix(character.size());
     }

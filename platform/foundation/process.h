@@ -17,12 +17,12 @@ std::string globallyUniqueString();
 /// $TMPDIR when it is set and absolute, else /tmp.
 URL temporaryDirectory();
 
-/// The variable's value, unless the process runs with more rights than its caller (set-user-ID), in which case
-/// nothing the caller set is listened to. Nothing when it is unset.
+/// The variable's value, unless the process runs with more rights than its caller (set-user-ID), in which
+/// case nothing the caller set is listened to. Nothing when it is unset.
 std::optional<std::string> secureEnvironment(const char* name);
 
-/// Whether `identifier` can be one file name here: not empty, at most 200 bytes, not "." or "..", without a slash
-/// or a control character. Text from a server must pass before it becomes part of a path.
+/// Whether `identifier` can be one file name here: not empty, at most 200 bytes, not "." or "..", without a
+/// slash or a control character. Text from a server must pass before it becomes part of a path.
 bool isSafeFileName(std::string_view identifier);
 
 }  // namespace pinwell::foundation

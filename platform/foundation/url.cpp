@@ -8,15 +8,23 @@ namespace {
 
 constexpr std::string_view kHexDigits = "0123456789ABCDEF";
 
-bool isAlpha(char c) { return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z'); }
-bool isDigit(char c) { return c >= '0' && c <= '9'; }
-bool isHexDigit(char c) { return isDigit(c) || (c >= 'a' && c <= 'f') || (c >= 'A' && c <= 'F'); }
+bool isAlpha(char c) {
+    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
+}
+bool isDigit(char c) {
+    return c >= '0' && c <= '9';
+}
+bool isHexDigit(char c) {
+    return isDigit(c) || (c >= 'a' && c <= 'f') || (c >= 'A' && c <= 'F');
+}
 
 // RFC 3986, section 2: reserved and unreserved characters.
 bool isUnreserved(char c) {
     return isAlpha(c) || isDigit(c) || std::string_view("-._~").find(c) != std::string_view::npos;
 }
-bool isReserved(char c) { return std::string_view(":/?#[]@!$&'()*+,;=").find(c) != std::string_view::npos; }
+bool isReserved(char c) {
+    return std::string_view(":/?#[]@!$&'()*+,;=").find(c) != std::string_view::npos;
+}
 
 std::string percentEncodePath(std::string_view path) {
     std::string text;
@@ -80,8 +88,8 @@ URL URL::fileURLWithPath(std::string_view path) {
     } else {
         std::error_code failure;
         const std::filesystem::path current = std::filesystem::current_path(failure);
-        // Without a current directory the path stays relative and leads nowhere; below the root it could lead to
-        // some other file.
+        // Without a current directory the path stays relative and leads nowhere; below the root it could lead
+        // to some other file.
         url.path_ = failure ? std::string(path) : tidyPath(current.native() + "/" + std::string(path));
     }
     return url;
@@ -90,7 +98,9 @@ URL URL::fileURLWithPath(std::string_view path) {
 std::optional<URL> URL::fromString(std::string_view text) {
     const std::size_t colon = text.find(':');
     if (colon == std::string_view::npos || colon == 0 || !isAlpha(text[0])) return std::nullopt;
-    const auto schemeCharacter = [](char c) { return isAlpha(c) || isDigit(c) || c == '+' || c == '-' || c == '.'; };
+    const auto schemeCharacter = [](char c) {
+        return isAlpha(c) || isDigit(c) || c == '+' || c == '-' || c == '.';
+    };
     if (!std::all_of(text.begin(), text.begin() + static_cast<std::ptrdiff_t>(colon), schemeCharacter))
         return std::nullopt;
     if (!isWellFormed(text)) return std::nullopt;
@@ -103,7 +113,8 @@ std::optional<URL> URL::fromString(std::string_view text) {
         rest.remove_prefix(2);
         std::string_view authority = rest.substr(0, rest.find_first_of("/?#"));
         rest.remove_prefix(authority.size());
-        if (const std::size_t at = authority.rfind('@'); at != std::string_view::npos) authority.remove_prefix(at + 1);
+        if (const std::size_t at = authority.rfind('@'); at != std::string_view::npos)
+            authority.remove_prefix(at + 1);
         if (authority.starts_with('[')) {
             const std::size_t close = authority.find(']');
             if (close == std::string_view::npos) return std::nullopt;
@@ -118,7 +129,9 @@ std::optional<URL> URL::fromString(std::string_view text) {
     return url;
 }
 
-std::string URL::absoluteString() const { return isFile_ ? "file://" + percentEncodePath(path_) : text_; }
+std::string URL::absoluteString() const {
+    return isFile_ ? "file://" + percentEncodePath(path_) : text_;
+}
 
 std::string URL::lastPathComponent() const {
     if (path_ == "/") return "/";
@@ -127,9 +140,12 @@ std::string URL::lastPathComponent() const {
 }
 
 std::string URL::pathExtension() const {
-    const std::string name = lastPathComponent();
+    return std::string(pathExtensionOfName(lastPathComponent()));
+}
+
+std::string_view pathExtensionOfName(std::string_view name) noexcept {
     const std::size_t dot = name.rfind('.');
-    if (dot == std::string::npos || dot == 0 || dot + 1 == name.size()) return {};
+    if (dot == std::string_view::npos || dot == 0 || dot + 1 == name.size()) return {};
     return name.substr(dot + 1);
 }
 

@@ -12,9 +12,9 @@ namespace pinwell::foundation {
 /// Immutable; copies are cheap enough to pass by value.
 class URL {
   public:
-    /// A relative path is taken against the current directory (left as it is when that has been removed). Trailing slashes, doubled slashes and "."
-    /// components are dropped; ".." stays, since what it means depends on links. An empty path stays empty and
-    /// names nothing.
+    /// A relative path is taken against the current directory (left as it is when that has been removed).
+    /// Trailing slashes, doubled slashes and "." components are dropped; ".." stays, since what it means
+    /// depends on links. An empty path stays empty and names nothing.
     static URL fileURLWithPath(std::string_view path);
 
     /// Nothing when `text` has no scheme, or holds a space, a control character, a character that RFC 3986
@@ -37,8 +37,7 @@ class URL {
 
     std::string lastPathComponent() const;
 
-    /// The last component's part behind its last dot, without the dot; empty when there is none, or when the
-    /// only dot begins or ends the name.
+    /// The last component's, as pathExtensionOfName has it.
     std::string pathExtension() const;
 
     /// A URL that names nothing stays as it is. The component is a name as the file system has it.
@@ -58,5 +57,9 @@ class URL {
     std::string path_;
     std::string text_;  // empty for a file
 };
+
+/// Of a file name: the part behind its last dot, without the dot; empty when there is none, or when the last
+/// dot begins or ends the name.
+std::string_view pathExtensionOfName(std::string_view name) noexcept;
 
 }  // namespace pinwell::foundation

@@ -38,11 +38,21 @@ bool Value::isNumber() const noexcept {
            std::holds_alternative<std::uint64_t>(content_) || std::holds_alternative<double>(content_);
 }
 
-const Data* Value::data() const noexcept { return shared<Data>(content_); }
-const URL* Value::url() const noexcept { return shared<URL>(content_); }
-const Error* Value::error() const noexcept { return shared<Error>(content_); }
-const Array* Value::array() const noexcept { return shared<Array>(content_); }
-const Dictionary* Value::dictionary() const noexcept { return shared<Dictionary>(content_); }
+const Data* Value::data() const noexcept {
+    return shared<Data>(content_);
+}
+const URL* Value::url() const noexcept {
+    return shared<URL>(content_);
+}
+const Error* Value::error() const noexcept {
+    return shared<Error>(content_);
+}
+const Array* Value::array() const noexcept {
+    return shared<Array>(content_);
+}
+const Dictionary* Value::dictionary() const noexcept {
+    return shared<Dictionary>(content_);
+}
 
 std::uint64_t Value::unsignedIntegerValue() const noexcept {
     if (const auto* flag = std::get_if<bool>(&content_)) return *flag ? 1 : 0;

@@ -77,8 +77,8 @@ class Value {
     const std::uint64_t* unsignedInteger() const noexcept { return std::get_if<std::uint64_t>(&content_); }
     const double* real() const noexcept { return std::get_if<double>(&content_); }
 
-    /// The number as an unsigned word: negative integers wrap, fractions are cut, what does not fit saturates;
-    /// 0 for whatever is not a number.
+    /// The number as an unsigned word: negative integers wrap, fractions are cut, what does not fit
+    /// saturates; 0 for whatever is not a number.
     std::uint64_t unsignedIntegerValue() const noexcept;
 
     /// Whether the number is not zero; false for whatever is not a number.
@@ -87,7 +87,8 @@ class Value {
     const Value& operator[](std::string_view key) const;
     const Value& operator[](std::size_t index) const;
 
-    /// The description as it stands inside an array or dictionary (foundation::describe gives the one by itself).
+    /// The description as it stands inside an array or dictionary (foundation::describe gives the one by
+    /// itself).
     std::string describe(unsigned indent) const;
 
     bool operator==(const Value& other) const;
