@@ -1,8 +1,4 @@
-// The types that this platform declares: their identifiers, extensions, parents and descriptions.
-//
-//   identifier  reverse-DNS, as the tool's lists name them
-//   extension   lower case, without the dot; a type without extensions is reached by what the item is
-//   parents     what it directly conforms to; conformance is transitive and reflexive
+// The types that this platform declares, and which are kinds of which.
 #pragma once
 
 #include <array>
@@ -12,22 +8,24 @@
 
 namespace pinwell::types {
 
-struct TypeDeclaration {
+inline constexpr std::string_view kFolder = "public.folder";
+inline constexpr std::string_view kDirectory = "public.directory";
+inline constexpr std::string_view kData = "public.data";
+inline constexpr std::string_view kUnixExecutable = "public.unix-executable";
+inline constexpr std::string_view kSymbolicLink = "public.symlink";
+inline constexpr std::string_view kItem = "public.item";  // a device, a socket, a pipe
+inline constexpr std::string_view kApplication = "com.ostrel.application";
+inline constexpr std::string_view kDiskImage = "com.ostrel.disk-image";
+
+struct Declaration {
     std::string_view identifier;
-    std::array<std::string_view, 3> parents;
-    std::string_view description;
+    std::array<std::string_view, 3> parents;  // empty ones are none
 };
 
-struct ExtensionDeclaration {
-    std::string_view extension;
-    ItemKind kind;
-    std::string_view identifier;
-};
+/// Null for an identifier that is not declared.
+const Declaration* declarationOf(std::string_view identifier) noexcept;
 
-/// Null when the identifier is not declared.
-const TypeDeclaration* findType(std::string_view identifier);
-
-/// The identifier for an extension in lower case on an item of that kind; empty when none is declared.
-std::string_view findExtension(std::string_view extension, ItemKind kind);
+/// The identifier declared for an extension, in lower case, on that kind of item; empty when none is.
+std::string_view declaredIdentifier(std::string_view extension, ItemKind kind) noexcept;
 
 }  // namespace pinwell::types

@@ -2,81 +2,99 @@
 
 #include <gio/gio.h>
 
-#include <cstring>
+#include <algorithm>
 #include <memory>
+#include <vector>
 
-#include "foundation/bytes.h"
 #include "foundation/file_io.h"
 
 namespace pinwell::types {
 namespace {
 
-// The database keeps one small XML file per type.
-constexpr std::size_t kMaximumTypeFile = 256 * 1024;
-constexpr std::size_t kMaximumDescription = 200;
+constexpr std::size_t kLongestExtension = 255;  // of any file name on the host
+constexpr std::size_t kLargestDescription = 256 * 1024;
 
-struct GLibFree {
+struct FreeText {
     void operator()(char* text) const { g_free(text); }
 };
-using GLibString = std::unique_ptr<char, GLibFree>;
-
-struct ContextFree {
+struct FreeParser {
     void operator()(GMarkupParseContext* context) const { g_markup_parse_context_free(context); }
 };
 
-// Collects the text of the <comment> that has no language.
-struct DescriptionReader {
-    bool inside = false;
-    std::string text;
+// "text/plain": two parts that can stand in a path.
+bool isWellFormed(std::string_view type) {
+    const auto isPart = [](std::string_view part) {
+        return !part.empty() && part.front() != '.' && std::all_of(part.begin(), part.end(), [](char c) {
+            return g_ascii_isalnum(c) || std::string_view("-+._").find(c) != std::string_view::npos;
+        });
+    };
+    const std::size_t slash = type.find('/');
+    return slash != std::string_view::npos && isPart(type.substr(0, slash)) && isPart(type.substr(slash + 1));
+}
 
-    static void startElement(GMarkupParseContext*, const gchar* name, const gchar** attributes, const gchar**,
-                             gpointer self, GError**) {
-        bool hasLanguage = false;
-        for (; *attributes != nullptr; ++attributes) hasLanguage |= std::strcmp(*attributes, "xml:lang") == 0;
-        auto* reader = static_cast<DescriptionReader*>(self);
-        reader->inside = std::strcmp(name, "comment") == 0 && !hasLanguage && reader->text.empty();
+// The <comment> without a language among the children of the document's root.
+struct CommentReader {
+    bool inComment = false;
+    std::string comment;
+
+    static void startElement(GMarkupParseContext*, const char* name, const char** attributes, const char**,
+                             void* self, GError**) {
+        const std::string_view element(name);
+        static_cast<CommentReader*>(self)->inComment = element == "comment" && *attributes == nullptr;
     }
-    static void endElement(GMarkupParseContext*, const gchar*, gpointer self, GError**) {
-        static_cast<DescriptionReader*>(self)->inside = false;
+    static void endElement(GMarkupParseContext*, const char*, void* self, GError**) {
+        static_cast<CommentReader*>(self)->inComment = false;
     }
-    static void characters(GMarkupParseContext*, const gchar* text, gsize length, gpointer self, GError**) {
-        auto* reader = static_cast<DescriptionReader*>(self);
-        if (reader->inside) reader->text.append(text, length);
+    static void text(GMarkupParseContext*, const char* characters, gsize length, void* self, GError**) {
+        auto* reader = static_cast<CommentReader*>(self);
+        if (reader->inComment) reader->comment.append(characters, length);
     }
 };
 
-// GLib's own question for a description answers in the user's language; messages here are English.
-std::optional<std::string> englishDescription(const foundation::Data& document) {
-    const GMarkupParser parser{DescriptionReader::startElement, DescriptionReader::endElement,
-                               DescriptionReader::characters, nullptr, nullptr};
-    DescriptionReader reader;
-    const std::unique_ptr<GMarkupParseContext, ContextFree> context(
-        g_markup_parse_context_new(&parser, GMarkupParseFlags{}, &reader, nullptr));
+std::string untranslatedComment(foundation::ByteView document) {
     const std::string text = foundation::toString(document);
-    const bool parsed =
-        g_markup_parse_context_parse(context.get(), text.data(), static_cast<gssize>(text.size()), nullptr) != FALSE;
-    if (!parsed || reader.text.empty() || reader.text.size() > kMaximumDescription) return std::nullopt;
-    return reader.text;
+    const GMarkupParser parser{CommentReader::startElement, CommentReader::endElement, CommentReader::text,
+                               nullptr, nullptr};
+    CommentReader reader;
+    const std::unique_ptr<GMarkupParseContext, FreeParser> context(
+        g_markup_parse_context_new(&parser, GMarkupParseFlags{}, &reader, nullptr));
+    const bool parsed = g_markup_parse_context_parse(context.get(), text.data(),
+                                                     static_cast<gssize>(text.size()), nullptr) != FALSE;
+    return parsed ? reader.comment : std::string();
+}
+
+// Where the database's parts are, the user's own first.
+std::vector<std::string> dataDirectories() {
+    std::vector<std::string> directories{g_get_user_data_dir()};
+    for (const char* const* directory = g_get_system_data_dirs(); *directory != nullptr; ++directory)
+        directories.emplace_back(*directory);
+    return directories;
 }
 
 }  // namespace
 
-std::optional<std::string> mimeTypeForName(const std::string& name) {
-    gboolean uncertain = FALSE;
-    const GLibString type(g_content_type_guess(name.c_str(), nullptr, 0, &uncertain));
-    if (type == nullptr || g_content_type_is_unknown(type.get()) != FALSE) return std::nullopt;
-    return std::string(type.get());
+std::optional<std::string> mimeTypeForExtension(std::string_view extension) {
+    const bool canBeInAName = extension.find('\0') == std::string_view::npos &&
+                              extension.find('/') == std::string_view::npos &&
+                              extension.size() <= kLongestExtension;
+    if (!canBeInAName) return std::nullopt;
+    // No contents are handed over, and none are looked for: the library opens nothing by this name.
+    const std::string name = "name." + std::string(extension);
+    const std::unique_ptr<char, FreeText> type(g_content_type_guess(name.c_str(), nullptr, 0, nullptr));
+    const bool isKnown = type != nullptr && !g_content_type_is_unknown(type.get()) &&
+                         std::string_view(type.get()) != "application/x-zerosize" && isWellFormed(type.get());
+    if (!isKnown) return std::nullopt;
+    return type.get();
 }
 
-std::optional<std::string> mimeTypeDescription(const std::string& mimeType) {
-    const auto inDirectory = [&](const char* directory) -> std::optional<std::string> {
+std::optional<std::string> mimeDescription(const std::string& mimeType) {
+    if (!isWellFormed(mimeType)) return std::nullopt;
+    for (const std::string& directory : dataDirectories()) {
         const auto document =
-            foundation::readSmallFile(std::string(directory) + "/mime/" + mimeType + ".xml", kMaximumTypeFile);
-        return document ? englishDescription(*document) : std::nullopt;
-    };
-    if (auto found = inDirectory(g_get_user_data_dir())) return found;
-    for (const gchar* const* directory = g_get_system_data_dirs(); *directory != nullptr; ++directory)
-        if (auto found = inDirectory(*directory)) return found;
+            foundation::readSmallFile(directory + "/mime/" + mimeType + ".xml", kLargestDescription);
+        if (!document) continue;
+        if (std::string comment = untranslatedComment(*document); !comment.empty()) return comment;
+    }
     return std::nullopt;
 }
 

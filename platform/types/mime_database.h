@@ -1,16 +1,21 @@
-// The freedesktop.org shared MIME database, by file name alone: no file is ever opened.
+// The freedesktop.org shared MIME database, asked by extension. It is loaded by the first question. May be
+// used from any thread. No file but the database's own is opened.
 #pragma once
 
 #include <optional>
 #include <string>
+#include <string_view>
 
 namespace pinwell::types {
 
-/// The MIME type that the database declares for a file name ("text/plain"); nothing when it knows none.
-std::optional<std::string> mimeTypeForName(const std::string& name);
-
-/// The database's English description of the MIME type ("plain text document"), whatever the locale; nothing when it
+/// The type, as "text/plain", of files whose name ends in a dot and `extension`; nothing when the database
 /// has none.
-std::optional<std::string> mimeTypeDescription(const std::string& mimeType);
+std::optional<std::string> mimeTypeForExtension(std::string_view extension);
+
+/// The database's untranslated comment on a type, "plain text document"; nothing when there is none.
+///
+/// Read from the database directly: the library's own look-up translates by the environment's language, and
+/// the environment cannot be changed safely in a process with threads.
+std::optional<std::string> mimeDescription(const std::string& mimeType);
 
 }  // namespace pinwell::types

@@ -4,6 +4,7 @@
 #include <optional>
 
 #include "foundation/bytes.h"
+#include "foundation/url.h"
 #include "types/declarations.h"
 #include "types/mime_database.h"
 
@@ -11,68 +12,77 @@ namespace pinwell::types {
 namespace {
 
 constexpr std::string_view kDynamicPrefix = "dyn.";
-// Types that only the shared MIME database declares: what it calls them, below one name for each kind of item.
-constexpr std::string_view kMimeFilePrefix = "public.mime.";
-constexpr std::string_view kMimeDirectoryPrefix = "public.mime-directory.";
+constexpr std::string_view kPublicPrefix = "public.";
+constexpr std::string_view kPublicDirectoryPrefix = "public.directory.";
 
-char lowerCase(char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c; }
-
-// The extension in lower case, by the rule that a dot at either end of the name makes none.
-std::string extensionOf(std::string_view name) {
-    const std::size_t dot = name.rfind('.');
-    if (dot == std::string_view::npos || dot == 0 || dot + 1 == name.size()) return {};
-    std::string extension(name.substr(dot + 1));
-    std::transform(extension.begin(), extension.end(), extension.begin(), lowerCase);
+std::string lowerCaseExtension(std::string_view name) {
+    std::string extension(foundation::pathExtensionOfName(name));
+    for (char& c : extension)
+        if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
     return extension;
 }
 
-// "text/x-c++src" as part of an identifier, which holds letters, digits, dots and hyphens only.
-std::string identifierPart(std::string_view mimeType) {
-    std::string part(mimeType);
-    for (char& c : part) {
-        c = lowerCase(c);
-        const bool allowed = (c >= 'a' && c <= 'z') || (c >= '0' && c <= '9') || c == '-' || c == '.';
-        if (!allowed) c = c == '/' ? '.' : '-';
-    }
-    return part;
+std::string_view identifierWithoutExtension(const Item& item) {
+    if (item.kind == ItemKind::directory) return kFolder;
+    return item.isExecutable ? kUnixExecutable : kData;
 }
 
-class DeclaredTypeService final : public TypeService {
+// "public.text.plain" for a file, "public.directory.text.plain" for a directory.
+std::string identifierForMIMEType(std::string mimeType, ItemKind kind) {
+    std::replace(mimeType.begin(), mimeType.end(), '/', '.');
+    return std::string(kind == ItemKind::directory ? kPublicDirectoryPrefix : kPublicPrefix) + mimeType;
+}
+
+// What an identifier made by identifierForMIMEType is a kind of; nothing for any other.
+std::optional<std::string_view> parentOfMIMEIdentifier(std::string_view identifier) {
+    if (declarationOf(identifier) != nullptr) return std::nullopt;
+    const auto hasTwoParts = [&](std::string_view prefix) {
+        if (!identifier.starts_with(prefix)) return false;
+        const std::string_view rest = identifier.substr(prefix.size());
+        const std::size_t dot = rest.find('.');
+        return dot != std::string_view::npos && dot > 0 && dot + 1 < rest.size();
+    };
+    if (hasTwoParts(kPublicDirectoryPrefix)) return kDirectory;
+    if (hasTwoParts(kPublicPrefix)) return kData;
+    return std::nullopt;
+}
+
+class Service final : public TypeService {
   public:
     std::string typeIdentifier(const Item& item) override {
-        if (item.kind == ItemKind::symbolicLink) return "public.symlink";
-        if (item.kind == ItemKind::other) return "public.item";
-        const bool isDirectory = item.kind == ItemKind::directory;
-        const std::string extension = extensionOf(item.name);
-        if (extension.empty()) {
-            if (isDirectory) return "public.folder";
-            return item.isExecutable ? "public.unix-executable" : "public.data";
-        }
-        if (const auto declared = findExtension(extension, item.kind); !declared.empty()) return std::string(declared);
-        if (const auto mimeType = mimeTypeForName(std::string(item.name)))
-            return std::string(isDirectory ? kMimeDirectoryPrefix : kMimeFilePrefix) + identifierPart(*mimeType);
+        if (item.kind == ItemKind::symbolicLink) return std::string(kSymbolicLink);
+        if (item.kind == ItemKind::other) return std::string(kItem);
+        const std::string extension = lowerCaseExtension(item.name);
+        if (extension.empty()) return std::string(identifierWithoutExtension(item));
+        if (const auto declared = declaredIdentifier(extension, item.kind); !declared.empty())
+            return std::string(declared);
+        if (auto mimeType = mimeTypeForExtension(extension))
+            return identifierForMIMEType(std::move(*mimeType), item.kind);
         return std::string(kDynamicPrefix) + foundation::toHex(foundation::asBytes(extension));
     }
 
     std::string localizedDescription(const Item& item) override {
         if (item.kind == ItemKind::symbolicLink) return "alias";
-        const std::string extension = extensionOf(item.name);
-        if (const auto declared = findExtension(extension, item.kind); !declared.empty())
-            return std::string(findType(declared)->description);
-        if (item.kind == ItemKind::directory) return "folder";
-        if (item.kind == ItemKind::other || extension.empty()) return "document";
-        const auto mimeType = mimeTypeForName(std::string(item.name));
-        return mimeType ? mimeTypeDescription(*mimeType).value_or("document") : "document";
+        if (item.kind == ItemKind::other) return "document";
+        const std::string extension = lowerCaseExtension(item.name);
+        const std::string_view declared = declaredIdentifier(extension, item.kind);
+        if (conforms(declared, kDiskImage)) return "disk image";
+        if (conforms(declared, kApplication)) return "application";
+        if (declared.starts_with("com.ostrel.installer-")) return "installer package";
+        if (item.kind == ItemKind::directory) return declared.empty() ? "folder" : "document";
+        const auto mimeType = extension.empty() ? std::nullopt : mimeTypeForExtension(extension);
+        return (mimeType ? mimeDescription(*mimeType) : std::nullopt).value_or("document");
     }
 
     bool conforms(std::string_view identifier, std::string_view to) override {
+        if (identifier.empty() || to.empty()) return false;
         if (identifier == to) return true;
-        if (identifier.starts_with(kMimeFilePrefix)) return conforms("public.data", to);
-        if (identifier.starts_with(kMimeDirectoryPrefix)) return conforms("public.directory", to);
-        const TypeDeclaration* type = findType(identifier);
-        return type != nullptr && std::any_of(type->parents.begin(), type->parents.end(), [&](std::string_view parent) {
-                   return !parent.empty() && conforms(parent, to);
-               });
+        if (const Declaration* declaration = declarationOf(identifier)) {
+            return std::any_of(declaration->parents.begin(), declaration->parents.end(),
+                               [&](std::string_view parent) { return conforms(parent, to); });
+        }
+        const auto parent = parentOfMIMEIdentifier(identifier);
+        return parent && conforms(*parent, to);
     }
 
     bool isDynamic(std::string_view identifier) override { return identifier.starts_with(kDynamicPrefix); }
@@ -80,6 +90,8 @@ class DeclaredTypeService final : public TypeService {
 
 }  // namespace
 
-std::unique_ptr<TypeService> makeTypeService() { return std::make_unique<DeclaredTypeService>(); }
+std::unique_ptr<TypeService> makeTypeService() {
+    return std::make_unique<Service>();
+}
 
 }  // namespace pinwell::types
