@@ -1,10 +1,12 @@
 #include "defaults/user_defaults.h"
 
-#include <cstdlib>
 #include <optional>
+#include <string>
+#include <utility>
 
 #include "foundation/file_io.h"
 #include "foundation/json.h"
+#include "foundation/process.h"
 
 namespace pinwell::defaults {
 namespace {
@@ -12,56 +14,73 @@ namespace {
 using foundation::Dictionary;
 using foundation::Value;
 
-// The directory of the domain files (XDG Base Directory Specification: a relative path there is ignored).
-std::optional<std::string> configurationDirectory() {
-    if (const char* directory = std::getenv("XDG_CONFIG_HOME"); directory != nullptr && *directory == '/')
-        return std::string(directory);
-    if (const char* home = std::getenv("HOME"); home != nullptr && *home == '/') return std::string(home) + "/.config";
-    return std::nullopt;
-}
-
-// What the domain's file holds; nil when there is none, or it is no JSON object.
-Value readDomain(std::string_view domain) {
-    const auto directory = configurationDirectory();
-    if (!directory) return {};
-    const auto document =
-        foundation::readSmallFile(*directory + "/" + std::string(domain) + ".json", kMaximumDomainFile);
-    if (!document) return {};
-    auto parsed = foundation::parseJSON(*document);
-    return parsed && parsed->dictionary() != nullptr ? *std::move(parsed) : Value();
-}
-
-class FileUserDefaults final : public UserDefaults {
+class Domain final : public UserDefaults {
   public:
-    explicit FileUserDefaults(Value stored) : stored_(std::move(stored)) {}
+    explicit Domain(Dictionary chosen) : chosen_(std::move(chosen)) {}
 
-    void registerDefaults(Dictionary defaults) override { registered_ = std::move(defaults); }
+    void registerDefaults(Dictionary defaults) override {
+        for (auto& [key, value] : defaults) registered_.insert_or_assign(key, std::move(value));
+    }
 
     std::string stringForKey(std::string_view key) override {
-        if (const std::string* text = stored_[key].string()) return *text;
-        const std::string* text = registered_[key].string();
+        const std::string* text = find(key, &Value::string);
         return text == nullptr ? std::string() : *text;
     }
 
     bool boolForKey(std::string_view key) override {
-        const Value& value = stored_[key];
-        return value.isNumber() ? value.boolValue() : registered_[key].boolValue();
+        const bool* flag = find(key, &Value::boolean);
+        return flag != nullptr && *flag;
     }
 
   private:
-    Value stored_;
-    Value registered_;
+    // The user's choice, when it is of the asked kind, else the registered default.
+    template <class T>
+    const T* find(std::string_view key, const T* (Value::*asKind)() const noexcept) const {
+        for (const Dictionary* values : {&chosen_, &registered_}) {
+            const auto found = values->find(key);
+            if (found == values->end()) continue;
+            if (const T* value = (found->second.*asKind)()) return value;
+        }
+        return nullptr;
+    }
+
+    Dictionary chosen_;
+    Dictionary registered_;
 };
 
-class FileUserDefaultsService final : public UserDefaultsService {
+// Where the domains are; nothing when the environment does not tell, or is not to be trusted.
+std::optional<std::string> configurationDirectory() {
+    // A relative path in this variable is to be ignored (XDG Base Directory Specification).
+    if (auto directory = foundation::secureEnvironment("XDG_CONFIG_HOME");
+        directory && directory->starts_with('/'))
+        return directory;
+    if (auto home = foundation::secureEnvironment("HOME"); home && home->starts_with('/'))
+        return *home + "/.config";
+    return std::nullopt;
+}
+
+Dictionary readDomain(std::string_view domain) {
+    const std::optional<std::string> directory = configurationDirectory();
+    if (!directory || !foundation::isSafeFileName(domain)) return {};
+    const auto document =
+        foundation::readSmallFile(*directory + "/" + std::string(domain) + ".json", kMaximumDomainFile);
+    if (!document) return {};
+    const auto values = foundation::parseJSON(*document);
+    if (!values || values->dictionary() == nullptr) return {};
+    return *values->dictionary();
+}
+
+class Service final : public UserDefaultsService {
   public:
     std::unique_ptr<UserDefaults> openDomain(std::string_view domain) override {
-        return std::make_unique<FileUserDefaults>(readDomain(domain));
+        return std::make_unique<Domain>(readDomain(domain));
     }
 };
 
 }  // namespace
 
-std::unique_ptr<UserDefaultsService> makeUserDefaultsService() { return std::make_unique<FileUserDefaultsService>(); }
+std::unique_ptr<UserDefaultsService> makeUserDefaultsService() {
+    return std::make_unique<Service>();
+}
 
 }  // namespace pinwell::defaults

@@ -12,8 +12,9 @@ namespace pinwell::defaults {
 /// Longest domain file that is read.
 inline constexpr std::size_t kMaximumDomainFile = 1024 * 1024;
 
-/// One opened domain. A value that is missing or of another type is answered from the registered defaults, value by
-/// value; so is every value when the file is missing or malformed. Not for use by two threads at once.
+/// One opened domain. A value that is missing or of another type is answered from the registered defaults,
+/// value by value; so is every value when the file is missing or malformed. Not for use by two threads at
+/// once.
 class UserDefaults {
   public:
     virtual ~UserDefaults() = default;

@@ -2,27 +2,52 @@
 
 #include <syslog.h>
 
-#include <algorithm>
+#include <mutex>
+#include <string>
 
 namespace pinwell::syslog {
 namespace {
 
-// syslogd implementations cut entries at lengths of their own from 1 KiB up; an entry never needs more.
-constexpr std::size_t kMaximumEntry = 1000;
+constexpr const char* kIdentity = "pinwell";  // syslog(3) keeps the pointer
+constexpr std::string_view kCutMark = "...";
 
-class LocalSystemLog final : public SystemLog {
+// At most the longest entry, never ending inside a UTF-8 sequence.
+std::string cut(std::string text) {
+    if (text.size() <= kLongestEntry) return text;
+    std::size_t end = kLongestEntry - kCutMark.size();
+    while (end > 0 && (static_cast<unsigned char>(text[end]) & 0xC0U) == 0x80) --end;
+    text.resize(end);
+    return text.append(kCutMark);
+}
+
+class HostLog final : public SystemLog {
   public:
-    void error(std::string_view text) override {
-        const int length = static_cast<int>(std::min(text.size(), kMaximumEntry));
-        ::openlog("pinwell", LOG_NDELAY, LOG_USER);
-        // The text is an argument and never the format: it may hold what a file says.
-        ::syslog(LOG_USER | LOG_ERR, "%.*s", length, text.data());
-        ::closelog();
+    HostLog() = default;
+    HostLog(const HostLog&) = delete;
+    HostLog& operator=(const HostLog&) = delete;
+    ~HostLog() override {
+        if (opened_) ::closelog();
     }
+
+    void error(std::string_view text) override {
+        // Not every caller's text has gone through format(); escaping what is escaped changes nothing. What
+        // is cut first need not be escaped to the end.
+        const std::string entry = cut(foundation::escapeForTerminal(text.substr(0, kLongestEntry + 1)));
+        const std::lock_guard lock(mutex_);
+        if (!opened_) ::openlog(kIdentity, LOG_PID, LOG_USER);
+        opened_ = true;
+        ::syslog(LOG_USER | LOG_ERR, "%s", entry.c_str());
+    }
+
+  private:
+    std::mutex mutex_;
+    bool opened_ = false;
 };
 
 }  // namespace
 
-std::unique_ptr<SystemLog> makeSystemLog() { return std::make_unique<LocalSystemLog>(); }
+std::unique_ptr<SystemLog> makeSystemLog() {
+    return std::make_unique<HostLog>();
+}
 
 }  // namespace pinwell::syslog

@@ -8,18 +8,20 @@
 
 namespace pinwell::syslog {
 
+/// Longest entry in bytes; a longer one is cut and ends in "...".
+inline constexpr std::size_t kLongestEntry = 2048;
+
 /// Where error entries go. May be used from any thread.
 class SystemLog {
   public:
     virtual ~SystemLog() = default;
 
-    /// One entry at error level; the text has its control characters escaped already.
+    /// One entry at error level, word for word: a percent sign means itself. Control characters are escaped.
     virtual void error(std::string_view text) = 0;
 
     template <class... Args>
-    void error(foundation::FormatString<std::type_identity_t<Args>...> format, const Args&... args)
-        requires(sizeof...(Args) > 0)
-    {
+    void error(foundation::FormatString<std::type_identity_t<Args>...> format,
+               const Args&... args) requires(sizeof...(Args) > 0) {
         error(std::string_view(foundation::format(format, args...)));
     }
 };

@@ -1,4 +1,4 @@
-// A system log that keeps its entries.
+// A system log that keeps its entries for the test to read.
 #pragma once
 
 #include <mutex>
@@ -10,9 +10,10 @@
 namespace pinwell::test {
 
 /// May be used from any thread.
-class FakeSystemLog : public syslog::SystemLog {
+class FakeSystemLog final : public syslog::SystemLog {
   public:
     using SystemLog::error;
+
     void error(std::string_view text) override {
         const std::lock_guard lock(mutex_);
         entries_.emplace_back(text);
