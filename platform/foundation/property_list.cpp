@@ -19,6 +19,8 @@ namespace {
 // The library's dates count from 2001-01-01.
 constexpr std::int64_t kLibraryEpoch = 978307200;
 
+constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
+
 struct FreeNode {
     void operator()(plist_t node) const { plist_free(node); }
 };
@@ -161,8 +163,12 @@ Result<Value> parsePropertyList(ByteView document) {
     if (document.size() > kMaximumPropertyListSize)
         return Error(kDataErrorDomain, kExcessiveDocument,
                      fmt::format("The property list is longer than {} bytes.", kMaximumPropertyListSize));
+    // The library does not know the byte-order mark of UTF-8.
+    const bool isMarked =
+        toString(document.first(std::min(document.size(), kByteOrderMark.size()))) == kByteOrderMark;
+    if (isMarked) document = document.subspan(kByteOrderMark.size());
     const std::string text = toString(document);
-    const bool isBinary = text.starts_with(kBinaryPropertyListMagic);
+    const bool isBinary = !isMarked && text.starts_with(kBinaryPropertyListMagic);
     if (auto refusal = isBinary ? refuseBinaryPropertyList(document) : refuseXMLPropertyList(document))
         return std::move(*refusal);
     plist_t raw = nullptr;

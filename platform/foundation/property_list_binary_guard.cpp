@@ -61,7 +61,7 @@ class Guard {
     Extent measureContainer(ByteReader& reader, std::uint64_t count, bool isDictionary, unsigned depth);
     void checkLeaf(ByteReader& reader, Kind kind, unsigned low);
     std::uint64_t readLength(ByteReader& reader, unsigned low);
-    void requireText(std::uint64_t object);
+    void requireKey(std::uint64_t object);
     ByteReader readerAt(std::uint64_t object);
 
     std::uint64_t sized(ByteReader& reader, unsigned width, std::string_view what) {
@@ -77,6 +77,7 @@ class Guard {
     std::uint64_t root_ = 0;
     std::uint64_t tableOffset_ = 0;
     std::uint64_t references_ = 0;  // followed so far
+    std::uint64_t keys_ = 0;        // characters looked at so far
     std::vector<Extent> known_;     // by object; height 0 means not measured yet
 };
 
@@ -122,11 +123,21 @@ std::uint64_t Guard::readLength(ByteReader& reader, unsigned low) {
     return sized(reader, 1U << (marker & 0xFU), "length");
 }
 
-void Guard::requireText(std::uint64_t object) {
+// The library aborts the process on a key with a zero character in it.
+void Guard::requireKey(std::uint64_t object) {
     if (object >= known_.size()) refuse(0, "reference to no object");
     ByteReader reader = readerAt(object);
-    const auto kind = static_cast<Kind>(reader.u8("marker") >> 4U);
-    if (kind != Kind::ascii && kind != Kind::utf16) refuse(reader.position() - 1, "a key is not text");
+    const std::size_t at = reader.position();
+    const unsigned marker = reader.u8("marker");
+    const auto kind = static_cast<Kind>(marker >> 4U);
+    if (kind != Kind::ascii && kind != Kind::utf16) refuse(at, "a key is not text");
+    const std::uint64_t length = readLength(reader, marker & 0xFU);
+    if (length > kMaximumPropertyListContents - keys_) refuseSize("comes to too many bytes");
+    keys_ += length;
+    for (std::uint64_t i = 0; i < length; ++i) {
+        const unsigned unit = kind == Kind::ascii ? reader.u8("key") : reader.be16("key");
+        if (unit == 0) refuse(at, "a key holds a zero character");
+    }
 }
 
 void Guard::checkLeaf(ByteReader& reader, Kind kind, unsigned low) {
@@ -162,7 +173,7 @@ Extent Guard::measureContainer(ByteReader& reader, std::uint64_t count, bool isD
     Extent total{1, 1, 0};
     for (std::uint64_t i = 0; i < references; ++i) {
         const std::uint64_t child = sized(reader, referenceWidth_, "object reference");
-        if (isDictionary && i < count) requireText(child);
+        if (isDictionary && i < count) requireKey(child);
         const Extent extent = measure(child, depth + 1);
         total.height = std::max(total.height, extent.height + 1);
         total.values += extent.values;

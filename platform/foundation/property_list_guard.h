@@ -30,13 +30,14 @@ inline constexpr std::uint64_t kMaximumPropertyListContents = 64 * 1024 * 1024;
 ///                   number of objects, root object, table offset
 ///
 /// Refused: offsets and lengths outside the list, kinds that are no property list values (sets), keys that
-/// are not text, cycles, and what exceeds the limits of property_list.h.
+/// are not text or hold a zero character, cycles, and what exceeds the limits of property_list.h.
 std::optional<Error> refuseBinaryPropertyList(ByteView document);
 
 /// Nothing when the list may be parsed.
 ///
 /// Refused besides unbalanced, unknown or too deeply nested elements: a document type with an internal subset
-/// (where entities are declared), marked sections elsewhere than in text, zero bytes (and so UTF-16).
+/// (where entities are declared), marked sections elsewhere than in text, references to no character, zero
+/// bytes (and so UTF-16).
 std::optional<Error> refuseXMLPropertyList(ByteView document);
 
 }  // namespace pinwell::foundation

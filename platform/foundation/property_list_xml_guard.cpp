@@ -2,6 +2,8 @@
 
 #include <algorithm>
 #include <array>
+#include <charconv>
+#include <system_error>
 #include <vector>
 
 #include "foundation/property_list.h"
@@ -10,7 +12,7 @@
 namespace pinwell::foundation {
 namespace {
 
-constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
+constexpr std::uint32_t kLastCodePoint = 0x10FFFF;
 constexpr std::string_view kWhiteSpace = " \t\r\n";
 
 constexpr std::array<std::string_view, 3> kContainers{"plist", "dict", "array"};
@@ -34,7 +36,6 @@ class Guard {
     explicit Guard(std::string_view document) : document_(document) {}
 
     void check() {
-        if (document_.starts_with(kByteOrderMark)) at_ = kByteOrderMark.size();
         if (const std::size_t zero = document_.find('\0'); zero != std::string_view::npos)
             refuse(zero, "zero byte");
         while (nextMarkup()) {
@@ -68,9 +69,29 @@ class Guard {
         if (!inLeaf()) {
             const std::size_t stray = document_.find_first_not_of(kWhiteSpace, at_);
             if (stray < next) refuse(stray, "text outside a value");
+        } else {
+            checkCharacterReferences(document_.substr(at_, next - at_));
         }
         at_ = next;
         return at_ < document_.size();
+    }
+
+    // What the library makes of a reference to no character, or to the zero character, is not to be relied
+    // on.
+    void checkCharacterReferences(std::string_view text) const {
+        for (std::size_t at = text.find("&#"); at != std::string_view::npos; at = text.find("&#", at + 1)) {
+            const std::size_t semicolon = text.find(';', at);
+            if (semicolon == std::string_view::npos) refuse(at_ + at, "reference to no character");
+            std::string_view number = text.substr(at + 2, semicolon - (at + 2));
+            const int base = number.starts_with('x') ? 16 : 10;
+            if (base == 16) number.remove_prefix(1);
+            std::uint32_t character = 0;
+            const auto [end, fault] =
+                std::from_chars(number.data(), number.data() + number.size(), character, base);
+            const bool isNumber = fault == std::errc() && end == number.data() + number.size();
+            if (!isNumber || character == 0 || character > kLastCodePoint)
+                refuse(at_ + at, "reference to no character");
+        }
     }
 
     void skipPast(std::string_view end, std::size_t opening) {

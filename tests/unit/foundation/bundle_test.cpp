@@ -1,0 +1,182 @@
+#include "foundation/bundle.h"
+
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+
+#include <filesystem>
+
+#include "foundation/property_list.h"
+#include "support/temporary_directory.h"
+
+namespace pinwell::foundation {
+namespace {
+
+// One bundle, made file by file.
+class SampleBundle {
+  public:
+    explicit SampleBundle(std::string_view name) : path_(directory_ / name) {
+        std::filesystem::create_directory(path_);
+    }
+
+    const std::string& path() const { return path_; }
+    std::string operator/(std::string_view name) const { return path_ + "/" + std::string(name); }
+
+    SampleBundle& file(std::string_view name, std::string_view contents = "x") {
+        test::writeFile(*this / name, contents);
+        return *this;
+    }
+    SampleBundle& list(std::string_view name, const Value& executable) {
+        return file(name, toString(*serializePropertyList(Dictionary{{"CFBundleExecutable", executable}})));
+    }
+    SampleBundle& link(std::string_view name, const std::string& target) {
+        std::filesystem::create_directories(std::filesystem::path(*this / name).parent_path());
+        std::filesystem::create_symlink(target, *this / name);
+        return *this;
+    }
+
+    std::optional<std::string> mainExecutable() const { return mainExecutableOfBundle(path_); }
+
+  private:
+    test::TemporaryDirectory directory_;
+    std::string path_;
+};
+
+TEST(Bundle, HasTheExecutableThatItsPropertyListNames) {
+    SampleBundle bundle("Sample.app");
+    bundle.list("Contents/Info.plist", "tool").file("Contents/MacDir/tool").file("Contents/MacDir/Sample");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/MacDir/tool");
+}
+
+TEST(Bundle, ReadsABinaryPropertyList) {
+    SampleBundle bundle("Sample.app");
+    // {"CFBundleExecutable": "tool"}: the objects at 8, 11 and 32, and the offset table at 37.
+    std::string list(
+        "bplist00\xD1\x01\x02\x5F\x10\x12"
+        "CFBundleExecutable"
+        "\x54tool"
+        "\x08\x0B\x20",
+        40);
+    list += std::string(6, '\0') + std::string("\1\1", 2);
+    for (const char number : {'\x03', '\0', '\x25'}) list += std::string(7, '\0') + number;
+    ASSERT_TRUE(parsePropertyList(asBytes(list)));
+    bundle.file("Contents/Info.plist", list).file("Contents/D/tool");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/D/tool");
+}
+
+TEST(Bundle, FallsBackOnItsOwnName) {
+    SampleBundle bundle("Sample.app");
+    bundle.file("Contents/Anything/Sample");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/Anything/Sample");
+}
+
+TEST(Bundle, FallsBackOnItsOwnNameWhenThePropertyListNamesNothing) {
+    for (const Value& name :
+         {Value("../../etc/passwd"), Value(".."), Value("."), Value(""), Value(5), Value("a/b")}) {
+        SampleBundle bundle("Sample.app");
+        bundle.list("Contents/Info.plist", name).file("Contents/D/Sample").file("Contents/D/a/b");
+        EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/D/Sample");
+    }
+}
+
+TEST(Bundle, FallsBackOnItsOwnNameWhenThePropertyListIsMalformed) {
+    SampleBundle bundle("Sample.app");
+    bundle.file("Contents/Info.plist", "junk")
+        .list("Info.plist", "other")
+        .file("Contents/D/Sample")
+        .file("Contents/D/other");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/D/Sample");
+}
+
+TEST(Bundle, LooksForItsPropertyListInOrder) {
+    SampleBundle bundle("Sample.app");
+    bundle.list("Info.plist", "third").file("third").file("second").file("first");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "third");
+    bundle.list("Resources/Info.plist", "second");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "second");
+    bundle.list("Contents/Info.plist", "first").file("Contents/D/first");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/D/first");
+}
+
+TEST(Bundle, HasNoneWhenTheNamedFileIsMissing) {
+    SampleBundle bundle("Sample.app");
+    bundle.list("Contents/Info.plist", "tool").file("Contents/D/Sample");
+    EXPECT_EQ(bundle.mainExecutable(), std::nullopt);
+}
+
+TEST(Bundle, TakesTheFirstSubDirectoryInByteOrder) {
+    SampleBundle bundle("Sample.app");
+    bundle.file("Contents/b/Sample")
+        .file("Contents/a/other")
+        .file("Contents/B/Sample")
+        .file("Contents/c/Sample");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/B/Sample");
+}
+
+TEST(Bundle, LooksOnlyInDirectSubDirectoriesOfContents) {
+    SampleBundle bundle("Sample.app");
+    bundle.file("Contents/Sample").file("Contents/a/b/Sample").file("Sample");
+    EXPECT_EQ(bundle.mainExecutable(), std::nullopt);
+}
+
+TEST(Bundle, WithoutContentsHasItsExecutableInTheRoot) {
+    SampleBundle bundle("Sample.bundle");
+    bundle.file("Sample");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Sample");
+}
+
+TEST(Bundle, DoesNotTakeALinkForItsExecutable) {
+    SampleBundle bundle("Sample.app");
+    bundle.link("Contents/D/Sample", "/bin/sh");
+    EXPECT_EQ(bundle.mainExecutable(), std::nullopt);
+}
+
+TEST(Bundle, DoesNotLookThroughALinkForItsExecutable) {
+    SampleBundle bundle("Sample.app");
+    bundle.file("elsewhere/Sample").link("Contents/D", "../elsewhere");
+    EXPECT_EQ(bundle.mainExecutable(), std::nullopt);
+}
+
+TEST(Bundle, DoesNotTakeADirectoryOrAPipeForItsExecutable) {
+    SampleBundle bundle("Sample.app");
+    bundle.file("Contents/a/Sample/x").file("Contents/b/x");
+    ASSERT_EQ(mkfifo((bundle / "Contents/b/Sample").c_str(), 0600), 0);
+    EXPECT_EQ(bundle.mainExecutable(), std::nullopt);
+}
+
+TEST(Bundle, DoesNotWaitForAPipeInPlaceOfItsPropertyList) {
+    SampleBundle bundle("Sample.app");
+    bundle.file("Contents/D/Sample");
+    ASSERT_EQ(mkfifo((bundle / "Contents/Info.plist").c_str(), 0600), 0);
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/D/Sample");
+}
+
+TEST(Framework, IsLookedAtThroughItsCurrentVersion) {
+    SampleBundle bundle("Kit.framework");
+    bundle.file("Versions/A/Kit").file("Versions/A/tool").list("Versions/A/Resources/Info.plist", "tool");
+    bundle.link("Versions/Current", "A");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Versions/Current/tool");
+}
+
+TEST(Framework, FallsBackOnItsOwnName) {
+    SampleBundle bundle("Kit.framework");
+    bundle.file("Versions/A/Kit").link("Versions/Current", "A");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Versions/Current/Kit");
+}
+
+TEST(Framework, WithALinkThatLeadsNowhereIsAFlatBundle) {
+    SampleBundle bundle("Kit.framework");
+    bundle.file("Kit").link("Versions/Current", "missing");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Kit");
+}
+
+TEST(Bundle, IsADirectory) {
+    SampleBundle bundle("Sample.app");
+    bundle.file("file");
+    EXPECT_EQ(mainExecutableOfBundle(bundle / "file"), std::nullopt);
+    EXPECT_EQ(mainExecutableOfBundle(bundle / "nothing"), std::nullopt);
+    EXPECT_EQ(mainExecutableOfBundle(bundle.path()), std::nullopt);
+    EXPECT_EQ(mainExecutableOfBundle("/"), std::nullopt);
+}
+
+}  // namespace
+}  // namespace pinwell::foundation

@@ -1,0 +1,64 @@
+#include "foundation/error.h"
+
+#include <gtest/gtest.h>
+
+#include <cerrno>
+
+namespace pinwell::foundation {
+namespace {
+
+TEST(Error, OfThePlatformNamesThePath) {
+    const Error error = Error::posix(ENOENT, "/a/b");
+    EXPECT_EQ(error.domain(), kPOSIXErrorDomain);
+    EXPECT_EQ(error.code(), ENOENT);
+    EXPECT_EQ(error.localizedFailureReason(), "No such file or directory");
+    EXPECT_EQ(error.localizedDescription(), "/a/b: No such file or directory");
+}
+
+TEST(Error, WithoutAPathIsTheBareReason) {
+    EXPECT_EQ(Error::posix(EACCES).localizedDescription(), "Permission denied");
+    EXPECT_TRUE(Error::posix(EACCES).userInfo().empty());
+}
+
+TEST(Error, OfAnUnknownNumberStillSaysSomething) {
+    EXPECT_EQ(Error::posix(987654).localizedFailureReason(), "Error 987654.");
+    EXPECT_EQ(Error::osStatus(-12345).localizedFailureReason(), "Status -12345.");
+    EXPECT_EQ(Error::osStatus(kParameterError).localizedFailureReason(), "A parameter was not valid.");
+}
+
+TEST(Error, TakesFurtherUserInformation) {
+    const Error error = Error("D", 1, "t").with("k", 1).with("k", 2);
+    ASSERT_EQ(error.userInfo().size(), 1U);
+    EXPECT_EQ(error.userInfo().at("k"), Value(2));
+}
+
+TEST(Error, EqualsOneWithTheSameContents) {
+    EXPECT_EQ(Error("D", 1, "t").with("k", Error("E", 2, "u")),
+              Error("D", 1, "t").with("k", Error("E", 2, "u")));
+    EXPECT_NE(Error("D", 1, "t"), Error("D", 2, "t"));
+}
+
+TEST(Result, IsAValueOrAnError) {
+    const Result<int> good = 5;
+    const Result<int> bad = Error("D", 1, "t");
+    ASSERT_TRUE(good);
+    EXPECT_EQ(*good, 5);
+    ASSERT_FALSE(bad);
+    EXPECT_EQ(bad.error().code(), 1);
+    EXPECT_FALSE(Result<int>(bad).asOptional());
+}
+
+TEST(Result, OfAValueTellsAnErrorFromAnErrorValue) {
+    const Result<Value> failed = Error("D", 1, "t");
+    const Result<Value> holding = Value(Error("D", 1, "t"));
+    EXPECT_FALSE(failed);
+    EXPECT_TRUE(holding);
+}
+
+TEST(Result, OfNothingIsSuccessByDefault) {
+    EXPECT_TRUE(Result<void>());
+    EXPECT_FALSE(Result<void>(Error("D", 1, "t")));
+}
+
+}  // namespace
+}  // namespace pinwell::foundation

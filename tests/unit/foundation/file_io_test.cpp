@@ -1,0 +1,134 @@
+#include "foundation/file_io.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <filesystem>
+
+#include "support/temporary_directory.h"
+
+namespace pinwell::foundation {
+namespace {
+
+using test::TemporaryDirectory;
+
+// The errno value with which the read fails, 0 when it does not.
+std::int64_t failure(const std::string& path, std::size_t limit = 100) {
+    const auto result = readSmallFile(path, limit);
+    if (result) return 0;
+    EXPECT_EQ(result.error().domain(), kPOSIXErrorDomain);
+    EXPECT_EQ(result.error().userInfo().at(std::string(kFilePathKey)), Value(path));
+    return result.error().code();
+}
+
+TEST(SmallFile, IsReadWhole) {
+    const TemporaryDirectory directory;
+    const std::string contents(100'000, 'x');
+    test::writeFile(directory / "f", contents);
+    const auto result = readSmallFile(directory / "f", 1'000'000);
+    ASSERT_TRUE(result);
+    EXPECT_EQ(toString(*result), contents);
+}
+
+TEST(SmallFile, MayBeEmpty) {
+    const TemporaryDirectory directory;
+    test::writeFile(directory / "f", "");
+    const auto result = readSmallFile(directory / "f", 0);
+    ASSERT_TRUE(result);
+    EXPECT_TRUE(result->empty());
+}
+
+TEST(SmallFile, MayBeAsLongAsTheLimitAndNotAByteLonger) {
+    const TemporaryDirectory directory;
+    test::writeFile(directory / "f", std::string(100, 'x'));
+    EXPECT_EQ(failure(directory / "f", 100), 0);
+    EXPECT_EQ(failure(directory / "f", 99), EFBIG);
+}
+
+TEST(SmallFile, IsFoundBehindALink) {
+    const TemporaryDirectory directory;
+    test::writeFile(directory / "f", "x");
+    std::filesystem::create_symlink("f", directory / "link");
+    EXPECT_EQ(failure(directory / "link"), 0);
+}
+
+TEST(SmallFile, DoesNotClaimMemoryForASparseGiant) {
+    const TemporaryDirectory directory;
+    test::writeFile(directory / "f", "x");
+    std::filesystem::resize_file(directory / "f", std::uintmax_t{1} << 40U);
+    EXPECT_EQ(failure(directory / "f", 1000), EFBIG);
+}
+
+TEST(SmallFile, IsMissing) {
+    const TemporaryDirectory directory;
+    EXPECT_EQ(failure(directory / "nothing"), ENOENT);
+    EXPECT_FALSE(readSmallFile("", 100));
+}
+
+TEST(SmallFile, IsNeitherDirectoryNorDevice) {
+    const TemporaryDirectory directory;
+    EXPECT_EQ(failure(directory.path()), EISDIR);
+    EXPECT_EQ(failure("/dev/zero"), EINVAL);
+}
+
+TEST(SmallFile, IsNoPipeAndDoesNotWaitForOne) {
+    const TemporaryDirectory directory;
+    ASSERT_EQ(mkfifo((directory / "pipe").c_str(), 0600), 0);
+    EXPECT_EQ(failure(directory / "pipe"), EINVAL);
+}
+
+TEST(SmallFile, IsNoSocket) {
+    const TemporaryDirectory directory;
+    const FileDescriptor socket(::socket(AF_UNIX, SOCK_STREAM, 0));
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    const std::string path = directory / "s";
+    ASSERT_LT(path.size(), sizeof address.sun_path);
+    path.copy(address.sun_path, path.size());
+    ASSERT_EQ(bind(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+    EXPECT_EQ(failure(path), EINVAL);
+}
+
+TEST(SmallFile, IsNotNamedByWhatStandsBeforeAZeroByte) {
+    const TemporaryDirectory directory;
+    test::writeFile(directory / "f", "x");
+    EXPECT_EQ(failure((directory / "f") + std::string("\0g", 2)), EINVAL);
+}
+
+bool isOpen(int number) {
+    return fcntl(number, F_GETFD) >= 0;
+}
+
+TEST(FileDescriptor, ClosesWhatItOwns) {
+    int number = -1;
+    {
+        const FileDescriptor file(open("/dev/null", O_RDONLY | O_CLOEXEC));
+        ASSERT_TRUE(file);
+        number = file.get();
+    }
+    EXPECT_FALSE(isOpen(number));
+}
+
+TEST(FileDescriptor, PassesOwnershipOn) {
+    FileDescriptor first(open("/dev/null", O_RDONLY | O_CLOEXEC));
+    const int number = first.get();
+    FileDescriptor second(std::move(first));
+    EXPECT_EQ(second.get(), number);
+    FileDescriptor third(open("/dev/null", O_RDONLY | O_CLOEXEC));
+    const int replaced = third.get();
+    third = std::move(second);
+    EXPECT_EQ(third.get(), number);
+    EXPECT_FALSE(isOpen(replaced));
+    EXPECT_EQ(third.release(), number);
+    EXPECT_FALSE(third);
+    EXPECT_TRUE(isOpen(number));
+    close(number);
+}
+
+}  // namespace
+}  // namespace pinwell::foundation

@@ -1,0 +1,74 @@
+#include "foundation/process.h"
+
+#include <gtest/gtest.h>
+
+#include <regex>
+#include <set>
+
+#include "support/environment.h"
+
+namespace pinwell::foundation {
+namespace {
+
+using test::ScopedVariable;
+
+TEST(Process, IsNamedWithoutItsDirectory) {
+    EXPECT_EQ(processName(), "foundation_test");
+}
+
+TEST(Process, MakesStringsThatNeverRepeat) {
+    std::set<std::string> seen;
+    for (int i = 0; i < 1000; ++i) EXPECT_TRUE(seen.insert(globallyUniqueString()).second);
+}
+
+TEST(Process, MakesStringsOfVersion4) {
+    const std::regex version4("[0-9A-F]{8}-[0-9A-F]{4}-4[0-9A-F]{3}-[89AB][0-9A-F]{3}-[0-9A-F]{12}");
+    for (int i = 0; i < 100; ++i) EXPECT_TRUE(std::regex_match(globallyUniqueString(), version4));
+}
+
+TEST(TemporaryDirectory, IsTheOneThatTheEnvironmentNames) {
+    const ScopedVariable variable("TMPDIR", "/var/some where/");
+    EXPECT_EQ(temporaryDirectory().path(), "/var/some where");
+}
+
+TEST(TemporaryDirectory, IsTheSystemsOwnWhenTheEnvironmentNamesNone) {
+    for (const std::optional<std::string>& value : {std::optional<std::string>(), {""}, {"relative/path"}}) {
+        const ScopedVariable variable("TMPDIR", value);
+        EXPECT_EQ(temporaryDirectory().path(), "/tmp");
+    }
+}
+
+TEST(SecureEnvironment, TellsEmptyFromUnset) {
+    const ScopedVariable empty("PINWELL_TEST_EMPTY", "");
+    const ScopedVariable unset("PINWELL_TEST_UNSET", std::nullopt);
+    EXPECT_EQ(secureEnvironment("PINWELL_TEST_EMPTY"), "");
+    EXPECT_EQ(secureEnvironment("PINWELL_TEST_UNSET"), std::nullopt);
+}
+
+TEST(SafeFileName, IsOneNameOfTheFileSystem) {
+    EXPECT_TRUE(isSafeFileName("a"));
+    EXPECT_TRUE(isSafeFileName("..."));
+    EXPECT_TRUE(isSafeFileName(".hidden"));
+    EXPECT_TRUE(isSafeFileName("a b\xC3\xA9"));
+    EXPECT_TRUE(isSafeFileName(std::string(200, 'x')));
+}
+
+TEST(SafeFileName, IsNotEmptyNorTooLongNorADirectory) {
+    EXPECT_FALSE(isSafeFileName(""));
+    EXPECT_FALSE(isSafeFileName("."));
+    EXPECT_FALSE(isSafeFileName(".."));
+    EXPECT_FALSE(isSafeFileName(std::string(201, 'x')));
+}
+
+TEST(SafeFileName, HoldsNeitherSlashNorControlCharacter) {
+    EXPECT_FALSE(isSafeFileName("a/b"));
+    EXPECT_FALSE(isSafeFileName("/"));
+    EXPECT_FALSE(isSafeFileName("a\n"));
+    EXPECT_FALSE(isSafeFileName("\x1B"));
+    EXPECT_FALSE(isSafeFileName("\x7F"));
+    EXPECT_FALSE(isSafeFileName("a\xC2\x9B"));
+    EXPECT_FALSE(isSafeFileName(std::string_view("a\0b", 3)));
+}
+
+}  // namespace
+}  // namespace pinwell::foundation
