@@ -1,83 +1,145 @@
 #include "defaults/user_defaults.h"
 
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 
-#include <cstdlib>
 #include <filesystem>
 
+#include "support/environment.h"
+#include "support/fake_user_defaults.h"
 #include "support/temporary_directory.h"
 
 namespace pinwell::defaults {
 namespace {
 
-class UserDefaultsDomain : public testing::Test {
-  protected:
-    UserDefaultsDomain() { setenv("XDG_CONFIG_HOME", directory.path().c_str(), 1); }
-    ~UserDefaultsDomain() override { unsetenv("XDG_CONFIG_HOME"); }
+using foundation::Dictionary;
+using test::ScopedVariable;
+using test::TemporaryDirectory;
 
-    std::unique_ptr<UserDefaults> open(std::string_view document) {
-        test::writeFile(directory / "com.example.tool.json", document);
-        return opened();
-    }
-    static std::unique_ptr<UserDefaults> opened() {
-        auto defaults = makeUserDefaultsService()->openDomain("com.example.tool");
-        defaults->registerDefaults({{"name", "registered"}, {"flag", true}});
+constexpr std::string_view kDomain = "com.example.tool";
+
+class UserDefaultsTest : public testing::Test {
+  protected:
+    std::unique_ptr<UserDefaults> open(std::string_view domain = kDomain) {
+        auto defaults = makeUserDefaultsService()->openDomain(domain);
+        defaults->registerDefaults({{"container", "registered"}, {"production", true}});
         return defaults;
     }
-    static void expectRegistered(UserDefaults& defaults) {
-        EXPECT_EQ(defaults.stringForKey("name"), "registered");
-        EXPECT_TRUE(defaults.boolForKey("flag"));
+
+    // The domain's file with these contents, opened.
+    std::unique_ptr<UserDefaults> openFile(std::string_view contents) {
+        test::writeFile(directory_ / "com.example.tool.json", contents);
+        return open();
     }
 
-    test::TemporaryDirectory directory;
+    // That every value is the registered one.
+    static void expectRegistered(UserDefaults& defaults) {
+        EXPECT_EQ(defaults.stringForKey("container"), "registered");
+        EXPECT_TRUE(defaults.boolForKey("production"));
+    }
+
+    TemporaryDirectory directory_;
+
+  private:
+    ScopedVariable configuration_{"XDG_CONFIG_HOME", directory_.path()};
 };
 
-TEST_F(UserDefaultsDomain, AnswersWhatItsFileHolds) {
-    const auto defaults = open(R"({"name":"stored","flag":false})");
-    EXPECT_EQ(defaults->stringForKey("name"), "stored");
-    EXPECT_FALSE(defaults->boolForKey("flag"));
+TEST_F(UserDefaultsTest, AnswerWhatTheUserChose) {
+    const auto defaults = openFile(R"({"container": "chosen", "production": false})");
+    EXPECT_EQ(defaults->stringForKey("container"), "chosen");
+    EXPECT_FALSE(defaults->boolForKey("production"));
 }
 
-TEST_F(UserDefaultsDomain, WithoutAFileAnswersTheRegisteredDefaults) { expectRegistered(*opened()); }
-
-TEST_F(UserDefaultsDomain, MalformedAnswersTheRegisteredDefaults) {
-    for (const char* document : {"", "{", "[]", "\"text\"", "{\"name\":\"stored\"} rest", "\xff\xfe"})
-        expectRegistered(*open(document));
+TEST_F(UserDefaultsTest, AnswerTheRegisteredValueForAMissingOne) {
+    const auto defaults = openFile(R"({"production": false})");
+    EXPECT_EQ(defaults->stringForKey("container"), "registered");
+    EXPECT_FALSE(defaults->boolForKey("production"));
 }
 
-TEST_F(UserDefaultsDomain, FallsBackValueByValue) {
-    const auto missing = open(R"({"name":"stored"})");
-    EXPECT_EQ(missing->stringForKey("name"), "stored");
-    EXPECT_TRUE(missing->boolForKey("flag"));
-    const auto mistyped = open(R"({"name":7,"flag":"no"})");
-    expectRegistered(*mistyped);
+TEST_F(UserDefaultsTest, AnswerTheRegisteredValueForOneOfAnotherType) {
+    const auto defaults = openFile(R"({"container": 5, "production": "false"})");
+    expectRegistered(*defaults);
+    expectRegistered(*openFile(R"({"container": null, "production": 0})"));
+    expectRegistered(*openFile(R"({"container": ["x"], "production": null})"));
 }
 
-TEST_F(UserDefaultsDomain, TakesANumberForABoolean) {
-    EXPECT_FALSE(open(R"({"flag":0})")->boolForKey("flag"));
-    EXPECT_TRUE(open(R"({"flag":1})")->boolForKey("flag"));
+TEST_F(UserDefaultsTest, MayBeEmptyText) {
+    EXPECT_EQ(openFile(R"({"container": ""})")->stringForKey("container"), "");
 }
 
-TEST_F(UserDefaultsDomain, AnswersNothingForAKeyThatNeitherHas) {
-    EXPECT_EQ(opened()->stringForKey("other"), "");
-    EXPECT_FALSE(opened()->boolForKey("other"));
+TEST_F(UserDefaultsTest, AnswerNothingForWhatNeitherKnows) {
+    const auto defaults = openFile("{}");
+    EXPECT_EQ(defaults->stringForKey("unknown"), "");
+    EXPECT_FALSE(defaults->boolForKey("unknown"));
+    EXPECT_EQ(defaults->stringForKey("production"), "");
+    EXPECT_FALSE(defaults->boolForKey("container"));
 }
 
-TEST_F(UserDefaultsDomain, TooLargeIsMalformed) {
-    expectRegistered(*open("{\"name\":\"" + std::string(kMaximumDomainFile, 'a') + "\"}"));
+TEST_F(UserDefaultsTest, AreTheRegisteredOnesWithoutAFile) {
+    expectRegistered(*open());
 }
 
-TEST_F(UserDefaultsDomain, IsInDotConfigBelowHomeWithoutXDGConfigHome) {
-    unsetenv("XDG_CONFIG_HOME");
-    const char* home = std::getenv("HOME");
-    const std::string saved = home == nullptr ? "" : home;
-    setenv("HOME", directory.path().c_str(), 1);
-    test::writeFile(directory / ".config/com.example.tool.json", std::string_view(R"({"name":"below home"})"));
-    EXPECT_EQ(opened()->stringForKey("name"), "below home");
-    setenv("XDG_CONFIG_HOME", "relative", 1);  // not absolute: ignored
-    EXPECT_EQ(opened()->stringForKey("name"), "below home");
-    if (home == nullptr) unsetenv("HOME");
-    else setenv("HOME", saved.c_str(), 1);
+TEST_F(UserDefaultsTest, AreTheRegisteredOnesWhenTheFileIsMalformed) {
+    for (const std::string_view contents :
+         {"", "junk", "[]", "\"text\"", R"({"container": "chosen")", R"({"container": "chosen"} x)"})
+        expectRegistered(*openFile(contents));
+}
+
+TEST_F(UserDefaultsTest, AreTheRegisteredOnesWhenTheFileIsTooLong) {
+    expectRegistered(
+        *openFile(R"({"container": "chosen", "production": false})" + std::string(kMaximumDomainFile, ' ')));
+}
+
+TEST_F(UserDefaultsTest, AreTheRegisteredOnesWhenTheFileIsADirectoryOrAPipe) {
+    const std::string path = directory_ / "com.example.tool.json";
+    std::filesystem::create_directory(path);
+    expectRegistered(*open());
+    std::filesystem::remove(path);
+    ASSERT_EQ(mkfifo(path.c_str(), 0600), 0);
+    expectRegistered(*open());
+}
+
+TEST_F(UserDefaultsTest, DoNotLeaveTheirDirectory) {
+    std::filesystem::create_directory(directory_ / "inner");
+    test::writeFile(directory_ / "outside.json", R"({"container": "chosen"})");
+    const ScopedVariable inner("XDG_CONFIG_HOME", directory_ / "inner");
+    expectRegistered(*open("../outside"));
+}
+
+TEST_F(UserDefaultsTest, RegisterAgainValueByValue) {
+    const auto defaults = openFile("{}");
+    defaults->registerDefaults({{"container", "again"}});
+    EXPECT_EQ(defaults->stringForKey("container"), "again");
+    EXPECT_TRUE(defaults->boolForKey("production"));
+}
+
+TEST_F(UserDefaultsTest, AreFoundBelowTheHomeDirectoryWithoutAConfigurationDirectory) {
+    test::writeFile(directory_ / ".config/com.example.tool.json", R"({"container": "home"})");
+    const ScopedVariable home("HOME", directory_.path());
+    for (const std::optional<std::string>& value : {std::optional<std::string>(), {""}, {"relative"}}) {
+        const ScopedVariable configuration("XDG_CONFIG_HOME", value);
+        EXPECT_EQ(open()->stringForKey("container"), "home");
+    }
+}
+
+TEST_F(UserDefaultsTest, AreTheRegisteredOnesWithoutAHomeDirectory) {
+    const ScopedVariable configuration("XDG_CONFIG_HOME", std::nullopt);
+    const ScopedVariable home("HOME", std::nullopt);
+    expectRegistered(*open());
+}
+
+TEST(FakeUserDefaults, AnswerAsTheRealOnesDo) {
+    test::FakeUserDefaultsService service;
+    service.domains.insert_or_assign("d", Dictionary{{"text", "chosen"}, {"flag", 1}});
+    const auto defaults = service.openDomain("d");
+    defaults->registerDefaults({{"text", "registered"}, {"flag", true}, {"other", "registered"}});
+    defaults->registerDefaults({{"other", "again"}});
+    EXPECT_EQ(defaults->stringForKey("text"), "chosen");
+    EXPECT_TRUE(defaults->boolForKey("flag"));
+    EXPECT_EQ(defaults->stringForKey("other"), "again");
+    EXPECT_EQ(defaults->stringForKey("unknown"), "");
+    EXPECT_EQ(service.openDomain("other")->stringForKey("text"), "");
+    EXPECT_EQ(service.opened, (std::vector<std::string>{"d", "other"}));
 }
 
 }  // namespace
