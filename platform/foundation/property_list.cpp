@@ -131,8 +131,10 @@ Node containerToNode(const Value& value, unsigned depth) {
         return array;
     }
     Node dictionary(plist_new_dict());
-    for (const auto& [key, member] : *value.dictionary())
-        plist_dict_set_item(dictionary.get(), xmlText(key), toNode(member, depth + 1).release());
+    for (const auto& [key, member] : *value.dictionary()) {
+        const char* name = xmlText(key);  // may throw, and so comes before ownership is given up
+        plist_dict_set_item(dictionary.get(), name, toNode(member, depth + 1).release());
+    }
     return dictionary;
 }
 
