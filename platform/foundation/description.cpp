@@ -161,15 +161,6 @@ std::string describe(const Dictionary& dictionary, unsigned indent) {
     return text;
 }
 
-std::string Description<Value>::of(const Value& value) {
-    if (value.string() != nullptr) return Description<std::string>::of(*value.string());
-    if (value.date() != nullptr) return Description<Date>::of(*value.date());
-    if (value.url() != nullptr) return Description<URL>::of(*value.url());
-    if (value.error() != nullptr) return Description<Error>::of(*value.error());
-    if (value.isNull()) return "<null>";
-    return value.describe(0);
-}
-
 std::string Value::describe(unsigned indent) const {
     struct Visitor {
         unsigned indent;
