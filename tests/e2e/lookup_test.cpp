@@ -2,7 +2,6 @@
 #include <sys/stat.h>
 
 #include <filesystem>
-#include <regex>
 
 #include "fixture.h"
 #include "foundation/base64.h"
@@ -11,14 +10,14 @@ namespace pinwell::test {
 namespace {
 
 using testing::AllOf;
-using testing::Contains;
+using testing::Each;
 using testing::ElementsAre;
 using testing::IsEmpty;
 using testing::MatchesRegex;
-using testing::Not;
-using testing::Pair;
+using testing::SizeIs;
 using testing::StartsWith;
 
+constexpr const char* kUniqueName = "[0-9A-F]{8}(-[0-9A-F]{4}){3}-[0-9A-F]{12}\\.ticket";
 constexpr const char* kWorked = "The staple and validate action worked!";
 
 class Lookup : public EndToEndTest {
@@ -301,9 +300,7 @@ TEST_F(Lookup, WithoutAnIdentifierTheTicketFileHasAUniqueName) {
     serve({.body = inlineRecord(ticket())});
     ASSERT_EQ(staple().exitStatus, 0);
     ASSERT_EQ(staple().exitStatus, 0);
-    const char* unique = "[0-9A-F]{8}-[0-9A-F]{4}-[0-9A-F]{4}-[0-9A-F]{4}-[0-9A-F]{12}\\.ticket";
-    EXPECT_THAT(temporaryFiles(),
-                ElementsAre(testing::ContainsRegex(unique), testing::ContainsRegex(unique)));
+    EXPECT_THAT(temporaryFiles(), AllOf(SizeIs(2), Each(MatchesRegex(kUniqueName))));
 }
 
 TEST_F(Lookup, AnIdentifierThatCannotBeAFileNameCountsAsAbsent) {
@@ -323,9 +320,7 @@ TEST_F(Lookup, AnIdentifierThatCannotBeAFileNameCountsAsAbsent) {
         serve(response);
         EXPECT_EQ(staple().exitStatus, 0) << identifier;
     }
-    const std::regex unique("[0-9A-F]{8}(-[0-9A-F]{4}){3}-[0-9A-F]{12}\\.ticket");
-    EXPECT_EQ(temporaryFiles().size(), hostile.size());
-    for (const std::string& name : temporaryFiles()) EXPECT_TRUE(std::regex_match(name, unique)) << name;
+    EXPECT_THAT(temporaryFiles(), AllOf(SizeIs(hostile.size()), Each(MatchesRegex(kUniqueName))));
     EXPECT_FALSE(std::filesystem::exists(directory / "escape.ticket"));
 }
 
