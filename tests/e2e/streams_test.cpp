@@ -94,8 +94,10 @@ TEST_F(Streams, ALargeTicketOnAClosedOutputIsWhole) {
     const std::string url = service().url("/${f}");
     const std::string record = R"({"records":[{"fields":{"signedTicketAsset":{"value":{"downloadURL":")" +
                                url + R"(","size":)" + std::to_string(genuine.size()) + "}}}}]}";
-    service().setHandler([this, record](const RecordedRequest& request) {
-        return request.method == "POST" ? answer(record) : Response{.body = foundation::toString(genuine)};
+    const Response asset{
+        .body = foundation::toString(genuine)};  // a copy: the server outlives this class's members
+    service().setHandler([record, asset](const RecordedRequest& request) {
+        return request.method == "POST" ? answer(record) : asset;
     });
     Command run = verboseStaple();
     run.output = Output::closed;
