@@ -22,6 +22,7 @@ function(pinwell_test name)
   endif()
   add_executable(${name} ${test_UNPARSED_ARGUMENTS})
   set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/tests)
+  target_compile_options(${name} PRIVATE ${pinwell_test_warnings})
   target_link_libraries(${name} PRIVATE pinwell_warnings pinwell_sanitizers test_support
                         GTest::gmock GTest::gtest_main)
   gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST PROPERTIES TIMEOUT ${test_TIMEOUT})
