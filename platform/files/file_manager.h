@@ -147,10 +147,10 @@ class FileManager {
     /// component (ELOOP), never blocks on what is not a regular file (EINVAL, EISDIR).
     virtual Result<Data> contentsOfFile(const URL& file) = 0;
 
-    /// Writes a file of mode 0600. Atomically: to a file beside it that is then flushed and renamed into
-    /// place, replacing whatever non-directory is there; a failure leaves nothing behind. Otherwise plainly:
-    /// a new file, which a failure removes, or an existing regular file overwritten, which a failure leaves
-    /// half written.
+    /// Writes a file of mode 0600 and flushes its contents to stable storage. Atomically: to a file beside it
+    /// that is then renamed into place, replacing whatever non-directory is there; a failure leaves nothing
+    /// behind. Otherwise plainly: a new file, which a failure removes, or an existing regular file
+    /// overwritten, which a failure leaves half written; the directory is not flushed.
     enum class Writing { plain, atomic };
     virtual Result<void> writeFile(ByteView contents, const URL& file, Writing writing) = 0;
 

@@ -19,7 +19,8 @@ Result<void> makePrivate(const OpenFile& file) {
 
 Result<void> fill(OpenFile& file, ByteView contents) {
     if (auto done = makePrivate(file); !done) return done;
-    return writeAll(file, contents);
+    if (auto done = writeAll(file, contents); !done) return done;
+    return flush(file.number(), file.path);
 }
 
 Result<void> overwrite(ByteView contents, const std::string& path) {
@@ -64,7 +65,6 @@ Result<void> writeFileAtomically(ByteView contents, const std::string& path) {
     const std::string temporary = std::exchange(file->path, path);  // an error names what the caller knows
     HalfMadeFile halfMade(temporary);
     if (auto done = fill(*file, contents); !done) return done;
-    if (auto done = flush(file->number(), path); !done) return done;
     if (auto done = closeReporting(*file); !done) return done;
     if (uninterrupted([&] { return std::rename(temporary.c_str(), path.c_str()); }) != 0)
         return lastError(path);

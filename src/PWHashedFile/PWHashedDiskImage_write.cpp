@@ -1,0 +1,94 @@
+// How a disk image gets its ticket, and loses it: a new superblob and the trailer, put where the image's data end.
+#include <limits>
+
+#include "foundation/process.h"
+#include "src/PWHashedFile/PWHashedDiskImage.h"
+#include "src/messages.h"
+
+namespace pinwell {
+
+using foundation::ByteView;
+
+bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& source, const URL& target,
+                                                   bool deleteExisting, ErrorOut error) {
+    const std::string name = target.lastPathComponent();
+    std::optional<Error> held;
+    const auto fail = [&] {
+        setAppropriateExitCode(kExitCannotCreate);
+        if (error != nullptr) *error = held;
+        return false;
+    };
+
+    Data ticket;  // from here on: empty when one is deleted, and only then
+    if (source && !deleteExisting) {
+        auto contents = platform().files.contentsOfFile(*source);
+        if (contents) ticket = *std::move(contents);
+        else held = contents.error();
+    }
+    const bool fitsABlob = !ticket.empty() && ticket.size() <= std::numeric_limits<std::uint32_t>::max();
+    if (!deleteExisting && !fitsABlob) {
+        NoisyLog("Cannot add a new ticket to %@. %@", name, held);
+        return fail();
+    }
+    if (deleteExisting && !ticketData()) {
+        NoisyLog("Cannot delete an existing ticket in %@ that doesn't exist.", name);
+        return fail();
+    }
+
+    const Data newSuperblob = superblobWithTicket(blobs_, ticket);
+    if (!newSuperblob.empty() && !writeSignature(newSuperblob, target, deleteExisting, held)) return fail();
+    setAppropriateExitCode(kExitOK);
+    return true;
+}
+
+bool PWHashedDiskImage::writeSignature(const Data& superblob, const URL& target, bool deleteExisting,
+                                       std::optional<Error>& held) {
+    dmgHeader_.setCodeSign(csStart_, superblob.size());
+    Data signatureAndTrailer = superblob;
+    foundation::append(signatureAndTrailer, dmgHeader_.bytes());
+    saveDebugCopy(signatureAndTrailer, held);
+
+    const std::string name = target.lastPathComponent();
+    const auto opened = platform().files.openForUpdating(target);
+    if (!opened) {
+        held = opened.error();
+        NoisyLog("All that work and I can't open %@ for writing.", name);
+        return false;
+    }
+    try {
+        writeAtEndOfData(**opened, signatureAndTrailer, name);
+        return true;
+    } catch (const files::FileHandleError& failure) {
+        NoisyLog("Fatal error while %@ ticket to %@. %@.", deleteExisting ? "deleting existing" : "writing new",
+                 target.path(), failure.what());
+        return false;
+    }
+}
+
+// Should the write of the image itself be cut short, this file has what it takes to repair it by hand.
+void PWHashedDiskImage::saveDebugCopy(ByteView signatureAndTrailer, std::optional<Error>& held) const {
+    files::FileManager& files = platform().files;
+    const URL copy = files.temporaryDirectory().appendingPathComponent(
+        foundation::format("%@.dmgData", foundation::globallyUniqueString()));
+    const auto saved = files.writeFile(signatureAndTrailer, copy, files::FileManager::Writing::plain);
+    if (!saved) {
+        held = saved.error();
+        return;
+    }
+    NoisyLog("A copy of the new disk image blobs and headers has been saved to %@. Enjoy.", copy.path());
+}
+
+void PWHashedDiskImage::writeAtEndOfData(files::FileHandle& file, ByteView signatureAndTrailer,
+                                         const std::string& name) const {
+    file.seek(endOfDMGData_);
+    file.write(signatureAndTrailer);
+    const std::uint64_t end = file.position();
+    if (origEOF_ > end) {
+        NoisyLog("Truncating %@ from to %llu bytes to %llu bytes.", name, origEOF_, end);
+        file.truncate(end);
+    }
+    file.synchronize();
+    file.close();
+}
+
+}  // namespace pinwell
