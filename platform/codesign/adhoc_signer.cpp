@@ -27,6 +27,7 @@ Data emptyRequirements() {
 
 Data digestOfContent(const ByteSource& source, std::uint64_t limit) {
     Hasher hasher(DigestType::sha256);
+    source.expectSequentialReads();
     for (std::uint64_t offset = 0; offset < limit;) {
         const auto length = static_cast<std::size_t>(std::min<std::uint64_t>(kPieceSize, limit - offset));
         hasher.update(source.read(offset, length));

@@ -44,6 +44,10 @@ FileSource::FileSource(const std::string& path) {
     size_ = static_cast<std::uint64_t>(status.st_size);
 }
 
+void FileSource::expectSequentialReads() const {
+    posix_fadvise(file_.get(), 0, 0, POSIX_FADV_SEQUENTIAL);
+}
+
 std::size_t FileSource::readAt(std::uint64_t offset, std::span<std::byte> buffer) const {
     std::size_t done = 0;
     while (done < buffer.size()) {

@@ -26,6 +26,9 @@ class ByteSource {
     /// first.
     Data read(std::uint64_t offset, std::size_t length) const;
 
+    /// A hint that all of it is about to be read, from the first byte to the last.
+    virtual void expectSequentialReads() const {}
+
   protected:
     /// Fills as much of `buffer` as there are bytes at `offset` and answers how much that was.
     virtual std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const = 0;
@@ -39,6 +42,9 @@ class FileSource final : public ByteSource {
     explicit FileSource(const std::string& path);
 
     std::uint64_t size() const override { return size_; }
+
+    /// Has the kernel read further ahead.
+    void expectSequentialReads() const override;
 
   private:
     std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const override;
