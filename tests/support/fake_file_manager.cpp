@@ -64,6 +64,18 @@ class RecordingFileManager::Record {
         failingNumbers_.insert_or_assign(number, reason);
     }
 
+    void cutRead(std::size_t number, std::uint64_t length) {
+        const std::lock_guard lock(mutex_);
+        cutReads_.insert_or_assign(number, length);
+    }
+
+    // How much of `length` the operation that was noted last may read.
+    std::uint64_t readableOf(std::uint64_t length) const {
+        const std::lock_guard lock(mutex_);
+        const auto found = cutReads_.find(operations_.size() - 1);
+        return found == cutReads_.end() ? length : std::min(length, found->second);
+    }
+
     void answerCloning(bool answer) {
         const std::lock_guard lock(mutex_);
         cloning_ = answer;
@@ -93,6 +105,7 @@ class RecordingFileManager::Record {
     std::vector<FileOperation> operations_;
     std::map<std::string, int, std::less<>> failingNames_;
     std::map<std::size_t, int> failingNumbers_;
+    std::map<std::size_t, std::uint64_t> cutReads_;
     std::optional<bool> cloning_;
     std::optional<TemporaryDirectory> trash_;
     std::size_t trashed_ = 0;
@@ -106,7 +119,7 @@ class RecordingFileManager::Handle final : public FileHandle {
     std::uint64_t seekToEnd() override { return note("seekToEnd"), real_->seekToEnd(); }
     std::uint64_t seek(std::uint64_t position) override { return note("seek"), real_->seek(position); }
     std::uint64_t position() override { return note("position"), real_->position(); }
-    Data read(std::uint64_t length) override { return note("read"), real_->read(length); }
+    Data read(std::uint64_t length) override { return note("read"), real_->read(record_->readableOf(length)); }
     void write(ByteView bytes) override { note("write"), real_->write(bytes); }
     void truncate(std::uint64_t length) override { note("truncate"), real_->truncate(length); }
     void synchronize() override { note("synchronize"), real_->synchronize(); }
@@ -148,6 +161,10 @@ void RecordingFileManager::fail(std::string_view name, int reason) {
 
 void RecordingFileManager::failOperation(std::size_t number, int reason) {
     record_->failOperation(number, reason);
+}
+
+void RecordingFileManager::cutRead(std::size_t number, std::uint64_t length) {
+    record_->cutRead(number, length);
 }
 
 void RecordingFileManager::answerCloning(bool answer) {

@@ -41,6 +41,10 @@ class RecordingFileManager final : public files::FileManager {
     /// The operation of that number, counted from 0 over all that were recorded, fails and does nothing.
     void failOperation(std::size_t number, int reason);
 
+    /// The operation of that number, counted the same way, is a handle's read and finds no more than `length`
+    /// bytes.
+    void cutRead(std::size_t number, std::uint64_t length);
+
     /// What volumeSupportsCloning answers, whatever the file system would say.
     void answerCloning(bool answer);
 

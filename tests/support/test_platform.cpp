@@ -16,7 +16,11 @@ TestPlatform::TestPlatform()
 }
 
 Platform TestPlatform::services() {
-    return {files, *types,       codeSigning, trust,
+    return servicesWith(codeSigning);
+}
+
+Platform TestPlatform::servicesWith(codesign::CodeSigningService& other) {
+    return {files, *types,       other,     trust,
             https, userDefaults, systemLog,   platformDirectory,
             [](int status) { throw ProcessExit{status}; }};
 }

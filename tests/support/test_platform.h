@@ -30,6 +30,9 @@ class TestPlatform {
     /// References to the members below.
     Platform services();
 
+    /// The same with another code-signing service, the real one for instance.
+    Platform servicesWith(codesign::CodeSigningService& other);
+
     /// What `action` ends the process with; nothing when it returns.
     template <class Action>
     std::optional<int> exitStatusOf(Action&& action) {
