@@ -41,7 +41,8 @@ bool PWHashedDiskImage::populateHeader() {
     const auto opened = platform().files.openForReading(*fileURL());
     if (!opened) {
         NoisyLog("Could not create file handle to %@. %@", *fileURL(), opened.error());
-        NoisyLog("Could not get disk image header from %@. %@", fileURL()->lastPathComponent(), opened.error());
+        NoisyLog("Could not get disk image header from %@. %@", fileURL()->lastPathComponent(),
+                 opened.error());
         return false;
     }
     files::FileHandle& file = **opened;
@@ -50,7 +51,8 @@ bool PWHashedDiskImage::populateHeader() {
     return (isSigned ? readSignature(file) : makeUpForMissingSignature()) && readBlobs();
 }
 
-// What cannot be read is only said here: the zeros in its place fail the next check, with a message of its own.
+// What cannot be read is only said here: the zeros in its place fail the next check, with a message of its
+// own.
 bool PWHashedDiskImage::readTrailer(files::FileHandle& file) {
     const std::string name = fileURL()->lastPathComponent();
     attempt([&] { origEOF_ = file.seekToEnd(); },
@@ -91,7 +93,8 @@ bool PWHashedDiskImage::readSignature(files::FileHandle& file) {
     const std::uint64_t trailerStart = origEOF_ - kUDIFHeaderSize;
     if (end != trailerStart) {
         NoisyLog(
-            "In a good disk image, the stored code signature end MUST match the UDIF header start. It currently "
+            "In a good disk image, the stored code signature end MUST match the UDIF header start. It "
+            "currently "
             "doesn't. (%llu vs %llu)",
             end, trailerStart);
         return false;
@@ -147,7 +150,8 @@ bool PWHashedDiskImage::readBlobs() {
         return false;
     }
     if (csLength_ != length) {
-        NoisyLog("The code signature block must be %llu bytes in length. However, it is %d.", csLength_, length);
+        NoisyLog("The code signature block must be %llu bytes in length. However, it is %d.", csLength_,
+                 length);
         return false;
     }
     blobs_ = orderedBlobSetForSuperBlob(superblob_, numBlobs_).value_or(BlobSet{});
@@ -168,7 +172,8 @@ std::optional<Data> PWHashedDiskImage::_cdHash() {
     const foundation::Value properties = basicCodeProperties(*fileURL(), platform());
     if (const Data* hash = properties[kCDHashKey].data(); hash != nullptr) {
         NoisyLog("Props are %@", properties);
-        setDigestAlgorithm(static_cast<std::uint32_t>(properties[kDigestAlgorithmKey].unsignedIntegerValue()));
+        setDigestAlgorithm(
+            static_cast<std::uint32_t>(properties[kDigestAlgorithmKey].unsignedIntegerValue()));
         return *hash;
     }
     if (syntheticCDHash_) return syntheticCDHash_;

@@ -6,8 +6,9 @@
 // | endOfDMGData | size - 512   | the code-signature superblob (blob_set.h); nothing in unsigned images |
 // | size - 512   | size         | the trailer (udif_header.h), which says where the superblob stands    |
 //
-// The ticket is a blob of the superblob. An unsigned image gets its superblob with its first ticket, between its
-// data and its trailer, and is known by a synthetic cdhash (synthetic_cdhash.h), which the ticket does not change.
+// The ticket is a blob of the superblob. An unsigned image gets its superblob with its first ticket, between
+// its data and its trailer, and is known by a synthetic cdhash (synthetic_cdhash.h), which the ticket does
+// not change.
 #pragma once
 
 #include "src/PWHashedFile/PWHashedFile.h"
@@ -40,8 +41,8 @@ class PWHashedDiskImage : public PWHashedFile {
     std::optional<Data> _ticketData() override;
     std::optional<Data> _cdHash() override;
 
-    /// Leaves a copy of what it writes in the temporary directory. Without an effect, and successful, when the
-    /// ticket to delete is the only blob there is.
+    /// Leaves a copy of what it writes in the temporary directory. Without an effect, and successful, when
+    /// the ticket to delete is the only blob there is.
     bool _writeNewTicketDataFromURL(const std::optional<URL>& source, const URL& target, bool deleteExisting,
                                     ErrorOut error) override;
 
@@ -58,8 +59,7 @@ class PWHashedDiskImage : public PWHashedFile {
     void saveDebugCopy(foundation::ByteView signatureAndTrailer, std::optional<Error>& held) const;
     void writeAtEndOfData(files::FileHandle& file, foundation::ByteView signatureAndTrailer,
                           const std::string& name) const;
-    bool writeSignature(const Data& superblob, const URL& target, bool deleteExisting,
-                        std::optional<Error>& held);
+    bool writeSignature(Data superblob, const URL& target, bool deleteExisting, std::optional<Error>& held);
 
     UDIFFileHeader dmgHeader_;
     Data superblob_;

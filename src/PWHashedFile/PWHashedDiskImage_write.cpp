@@ -1,5 +1,7 @@
-// How a disk image gets its ticket, and loses it: a new superblob and the trailer, put where the image's data end.
+// How a disk image gets its ticket, and loses it: a new superblob and the trailer, put where the image's data
+// end.
 #include <limits>
+#include <utility>
 
 #include "foundation/process.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
@@ -22,8 +24,10 @@ bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& sou
     Data ticket;  // from here on: empty when one is deleted, and only then
     if (source && !deleteExisting) {
         auto contents = platform().files.contentsOfFile(*source);
-        if (contents) ticket = *std::move(contents);
-        else held = contents.error();
+        if (contents)
+            ticket = *std::move(contents);
+        else
+            held = contents.error();
     }
     const bool fitsABlob = !ticket.empty() && ticket.size() <= std::numeric_limits<std::uint32_t>::max();
     if (!deleteExisting && !fitsABlob) {
@@ -35,16 +39,17 @@ bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& sou
         return fail();
     }
 
-    const Data newSuperblob = superblobWithTicket(blobs_, ticket);
-    if (!newSuperblob.empty() && !writeSignature(newSuperblob, target, deleteExisting, held)) return fail();
+    Data superblob = superblobWithTicket(blobs_, ticket);
+    if (!superblob.empty() && !writeSignature(std::move(superblob), target, deleteExisting, held))
+        return fail();
     setAppropriateExitCode(kExitOK);
     return true;
 }
 
-bool PWHashedDiskImage::writeSignature(const Data& superblob, const URL& target, bool deleteExisting,
+bool PWHashedDiskImage::writeSignature(Data superblob, const URL& target, bool deleteExisting,
                                        std::optional<Error>& held) {
     dmgHeader_.setCodeSign(csStart_, superblob.size());
-    Data signatureAndTrailer = superblob;
+    Data signatureAndTrailer = std::move(superblob);
     foundation::append(signatureAndTrailer, dmgHeader_.bytes());
     saveDebugCopy(signatureAndTrailer, held);
 
@@ -59,8 +64,8 @@ bool PWHashedDiskImage::writeSignature(const Data& superblob, const URL& target,
         writeAtEndOfData(**opened, signatureAndTrailer, name);
         return true;
     } catch (const files::FileHandleError& failure) {
-        NoisyLog("Fatal error while %@ ticket to %@. %@.", deleteExisting ? "deleting existing" : "writing new",
-                 target.path(), failure.what());
+        NoisyLog("Fatal error while %@ ticket to %@. %@.",
+                 deleteExisting ? "deleting existing" : "writing new", target.path(), failure.what());
         return false;
     }
 }

@@ -1,6 +1,7 @@
 #include "src/PWHashedFile/PWHashedFile.h"
 
 #include "src/PWHashedFile/PWHashedBundle.h"
+#include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/PWHashedFile/file_kind.h"
 #include "src/messages.h"
 
@@ -22,8 +23,8 @@ std::shared_ptr<PWHashedFile> PWHashedFile::initWithFileURL(const URL& fileURL, 
 
     switch (assessmentClassForUTI(platform.types, properties->typeIdentifier, fileURL.pathExtension())) {
         case AssessmentClass::bundle: return std::make_shared<PWHashedBundle>(fileURL, platform);
-        case AssessmentClass::package:
-        case AssessmentClass::diskImage: break;
+        case AssessmentClass::diskImage: return std::make_shared<PWHashedDiskImage>(fileURL, platform);
+        case AssessmentClass::package: break;
         case AssessmentClass::unknown:
             if (properties->isDirectory && platform.files.mainExecutableOfBundle(fileURL))
                 return std::make_shared<PWHashedBundle>(fileURL, platform);

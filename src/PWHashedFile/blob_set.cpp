@@ -44,8 +44,8 @@ std::vector<IndexEntry> readIndex(ByteView superblob, std::uint32_t count) {
     return entries;
 }
 
-// The blob from entry.offset to `end`; nothing when it is not what its own header says. Throws ShortRead when it
-// does not lie within the superblob.
+// The blob from entry.offset to `end`; nothing when it is not what its own header says. Throws ShortRead when
+// it does not lie within the superblob.
 std::optional<BlobRecord> readBlob(ByteView superblob, const IndexEntry& entry, std::uint64_t end) {
     ByteReader reader(superblob);
     reader.seek(entry.offset, "blob");

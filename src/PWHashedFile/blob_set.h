@@ -1,5 +1,5 @@
-// The code-signature superblob of a disk image, taken apart into its blobs and put together again. All integers
-// are big-endian; offsets count from the superblob's start.
+// The code-signature superblob of a disk image, taken apart into its blobs and put together again. All
+// integers are big-endian; offsets count from the superblob's start.
 //
 // | Offset         | Size      | Field                                                              |
 // |----------------|-----------|--------------------------------------------------------------------|
@@ -9,9 +9,9 @@
 // | 12             | 8 x count | index: slot type (4), offset of the blob (4)                       |
 // | 12 + 8 x count | rest      | blobs: magic (4), length with these 8 bytes (4), payload           |
 //
-// Stricter than what the code-signing service reads, since the parts are to be written back: the blobs follow the
-// index at once, in index order, back to back, and the last one ends where the superblob ends. Refused besides:
-// two equal index entries, and whatever exceeds the limits below. No blob is looked into.
+// Stricter than what the code-signing service reads, since the parts are to be written back: the blobs follow
+// the index at once, in index order, back to back, and the last one ends where the superblob ends. Refused
+// besides: two equal index entries, and whatever exceeds the limits below. No blob is looked into.
 #pragma once
 
 #include <cstdint>
@@ -32,12 +32,12 @@ inline constexpr std::uint32_t kTicketSlotType = 0x10002;
 inline constexpr std::uint32_t kTicketBlobMagic = 0xFADE0B01;
 
 /// Longest superblob that is read, room for the longest signature that the code-signing service reads and the
-/// longest file that a ticket can come from (64 MiB each). A length is a claim of the file, and where the file is
-/// sparse nothing stands behind it.
+/// longest file that a ticket can come from (64 MiB each). A length is a claim of the file, and where the
+/// file is sparse nothing stands behind it.
 inline constexpr std::uint64_t kMaximumSuperblobLength = 128ULL * 1024 * 1024;
 
-/// Most blobs that are told apart; a signature has about ten, and a record takes fifty times what the smallest
-/// blob does.
+/// Most blobs that are told apart; a signature has about ten, and a record takes fifty times what the
+/// smallest blob does.
 inline constexpr std::uint32_t kMaximumBlobCount = 65'536;
 
 /// Keys of a blob record.
@@ -58,9 +58,10 @@ std::uint64_t lengthOf(const BlobRecord& record);
 foundation::ByteView dataOf(const BlobRecord& record);
 
 /// The blobs of a whole superblob that says it has `numberOfBlobs`. Nothing when index entries are missing or
-/// equal, or when the blobs do not fill the superblob; fewer records than `numberOfBlobs` when a blob's own length
-/// is wrong and the others fill it all the same.
-std::optional<BlobSet> orderedBlobSetForSuperBlob(foundation::ByteView superblob, std::uint32_t numberOfBlobs);
+/// equal, or when the blobs do not fill the superblob; fewer records than `numberOfBlobs` when a blob's own
+/// length is wrong and the others fill it all the same.
+std::optional<BlobSet> orderedBlobSetForSuperBlob(foundation::ByteView superblob,
+                                                  std::uint32_t numberOfBlobs);
 
 /// What stands in for a missing signature: a header that counts no blobs.
 foundation::Data emptySuperblob();

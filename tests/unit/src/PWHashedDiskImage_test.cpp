@@ -1,0 +1,416 @@
+// Reading: trailer, superblob, ticket and cdhash.
+#include "src/PWHashedFile/PWHashedDiskImage.h"
+
+#include <filesystem>
+#include <fstream>
+#include <limits>
+
+#include "disk_image_fixture.h"
+#include "foundation/byte_writer.h"
+#include "foundation/process.h"
+
+namespace pinwell {
+namespace {
+
+using foundation::Data;
+using test::DiskImageBuilder;
+using test::Lines;
+using test::makeBlob;
+using test::MessageCapture;
+using test::SuperBlobBuilder;
+
+class DiskImage : public test::DiskImageTest {
+  protected:
+    // The lines printed while the image is read, which must end with exit code `code`.
+    Lines linesOfReading(std::int32_t code) {
+        const MessageCapture output(kVerbosityVerbose);
+        EXPECT_EQ(open().appropriateExitCode(), code);
+        return output.lines();
+    }
+    Lines linesOfReading(const DiskImageBuilder& builder, std::int32_t code) {
+        put(builder);
+        return linesOfReading(code);
+    }
+    static std::string codesignLine(std::uint64_t offset, std::uint64_t length) {
+        return foundation::format("Codesign offset 0x%llx length: %llu", offset, length);
+    }
+};
+
+TEST_F(DiskImage, IsWhatTheFactoryMakesOfADmgFile) {
+    put(DiskImageBuilder());
+    const auto file = PWHashedFile::initWithFileURL(url, platform.services());
+    EXPECT_NE(dynamic_cast<PWHashedDiskImage*>(file.get()), nullptr);
+    EXPECT_EQ(file->appropriateExitCode(), 0);
+    EXPECT_EQ(file->fileURL(), url);
+}
+
+TEST_F(DiskImage, SignedHasTheSuperblobAndItsBlobsInIndexOrder) {
+    const Data superblob = DiskImageBuilder::signature().build();
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(superblob), 0),
+              (Lines{codesignLine(1000, superblob.size()),
+                     foundation::format("Stored Codesign length: %tu number of blobs: 3", superblob.size()),
+                     foundation::format("Total Length: %tu Found blobs: 3", superblob.size())}));
+    const auto image = open();
+    EXPECT_EQ(image.superblob(), superblob);
+    EXPECT_EQ(image.numBlobs(), 3U);
+    ASSERT_EQ(image.blobs().size(), 3U);
+    EXPECT_EQ(slotTypeOf(image.blobs()[0]), 0U);
+    EXPECT_EQ(slotTypeOf(image.blobs()[2]), 0x10000U);
+    EXPECT_EQ(image.origEOF(), 1000 + superblob.size() + 512);
+    EXPECT_EQ(image.csStart(), 1000U);
+    EXPECT_EQ(image.endOfDMGData(), 1000U);
+    EXPECT_EQ(image.csLength(), superblob.size());
+    EXPECT_EQ(image.syntheticCDHash(), std::nullopt);
+    EXPECT_EQ(platform.codeSigning.createCalls, 0);
+}
+
+TEST_F(DiskImage, UnsignedHasTheEmptySuperblobAndASyntheticHash) {
+    const Lines lines = linesOfReading(DiskImageBuilder(), 0);
+    ASSERT_GE(lines.size(), 4U);
+    EXPECT_EQ(lines[0],
+              "Creating synthetic cdHash for unsigned disk image, image.dmg. Humanity must endure.");
+    EXPECT_EQ(lines[1], "Signing information is {");
+    EXPECT_EQ(lines[lines.size() - 2], "Stored Codesign length: 12 number of blobs: 0");
+    EXPECT_EQ(lines.back(), "Total Length: 12 Found blobs: 0");
+
+    const auto image = open();
+    EXPECT_EQ(image.superblob(), emptySuperblob());
+    EXPECT_TRUE(image.blobs().empty());
+    EXPECT_EQ(image.numBlobs(), 0U);
+    EXPECT_EQ(image.csStart(), 1000U);
+    EXPECT_EQ(image.endOfDMGData(), 1000U);
+    EXPECT_EQ(image.csLength(), 12U);
+    EXPECT_EQ(image.syntheticCDHash(), syntheticHash());
+    EXPECT_EQ(image.digestAlgorithm(), 2U);
+    EXPECT_EQ(image.dmgHeader().codeSignOffset(), 0U);
+    EXPECT_EQ(image.dmgHeader().codeSignLength(), 0U);
+}
+
+TEST_F(DiskImage, OfNothingButATrailerIsUnsigned) {
+    put(DiskImageBuilder().data({}));
+    const auto image = open();
+    EXPECT_EQ(image.appropriateExitCode(), 0);
+    EXPECT_EQ(image.origEOF(), 512U);
+    EXPECT_EQ(image.csStart(), 0U);
+    EXPECT_EQ(image.syntheticCDHash(), syntheticHash());
+}
+
+TEST_F(DiskImage, WithOnlyOneOfTheSignatureFieldsIsUnsigned) {
+    put(DiskImageBuilder().codeSignOffset(77));
+    EXPECT_EQ(open().syntheticCDHash(), syntheticHash());
+    put(DiskImageBuilder().codeSignLength(77));
+    EXPECT_EQ(open().syntheticCDHash(), syntheticHash());
+    EXPECT_EQ(open().appropriateExitCode(), 0);
+}
+
+TEST_F(DiskImage, WithASuperblobThatCountsNoBlobsIsSignedAndAccepted) {
+    put(DiskImageBuilder().superblob(emptySuperblob()));
+    const auto image = open();
+    EXPECT_EQ(image.appropriateExitCode(), 0);
+    EXPECT_TRUE(image.blobs().empty());
+    EXPECT_EQ(image.syntheticCDHash(), std::nullopt);
+}
+
+TEST_F(DiskImage, ThatCannotBeOpenedEndsWith66) {
+    platform.files.fail("openForReading", EACCES);
+    const Lines lines = linesOfReading(DiskImageBuilder(), 66);
+    ASSERT_EQ(lines.size(), 2U);
+    EXPECT_EQ(lines[0].find("Could not create file handle to " + url.absoluteString() + ". Error Domain="),
+              0U);
+    EXPECT_EQ(lines[1].find("Could not get disk image header from image.dmg. Error Domain="), 0U);
+}
+
+TEST_F(DiskImage, ThatDoesNotTellItsSizeIsTooSmall) {
+    platform.files.fail("handle.seekToEnd", EIO);
+    const Lines lines = linesOfReading(DiskImageBuilder(), 66);
+    ASSERT_EQ(lines.size(), 2U);
+    EXPECT_EQ(lines[0].find(
+                  "Could not get file size of image.dmg. This should not have happened. Cannot seekToEnd"),
+              0U);
+    EXPECT_EQ(lines[1], "image.dmg is too small (0 bytes) to be a proper disk image");
+}
+
+TEST_F(DiskImage, Of511BytesIsTooSmall) {
+    Data bytes = DiskImageBuilder().data({}).build();
+    bytes.pop_back();
+    test::writeFile(path, foundation::ByteView(bytes));
+    EXPECT_EQ(linesOfReading(66), Lines{"image.dmg is too small (511 bytes) to be a proper disk image"});
+}
+
+// The operations of reading, in order: 0 open, 1 seekToEnd, 2 seek and 3 read (trailer), 4 seek and 5 read
+// (superblob).
+TEST_F(DiskImage, WhoseTrailerCannotBeReadHasNoMagic) {
+    for (const std::size_t operation : {2U, 3U}) {
+        test::RecordingFileManager& files = platform.files;
+        files.failOperation(files.operations().size() + operation, EIO);
+        const Lines lines = linesOfReading(DiskImageBuilder(), 66);
+        ASSERT_EQ(lines.size(), 2U);
+        EXPECT_EQ(
+            lines[0].find("Could read UDIF header of image.dmg. This should not have happened. Cannot "), 0U);
+        EXPECT_EQ(lines[1], "Not a supported disk image format, 0");
+    }
+}
+
+TEST_F(DiskImage, WhoseTrailerIsReadShortHasNoMagic) {
+    platform.files.cutRead(3, 511);
+    EXPECT_EQ(linesOfReading(DiskImageBuilder(), 66), Lines{"Not a supported disk image format, 0"});
+}
+
+TEST_F(DiskImage, WithAnotherMagicIsRefusedWithItsBytesAsALittleEndianNumber) {
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().magic("kolx"), 66),
+              Lines{"Not a supported disk image format, 2020372331"});
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().magic("\xFF\xFF\xFF\xFF"), 66),
+              Lines{"Not a supported disk image format, -1"});
+}
+
+TEST_F(DiskImage, OfVersion3IsRefused) {
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().version(3), 66),
+              Lines{foundation::processName() +
+                    " only supports version 4 disk images while image.dmg is version 3."});
+}
+
+TEST_F(DiskImage, WhoseSignatureOverflowsIsRefusedInSilence) {
+    constexpr std::uint64_t kHuge = std::numeric_limits<std::uint64_t>::max();
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().codeSignOffset(2).codeSignLength(kHuge - 1), 66),
+              Lines{codesignLine(2, kHuge - 1)});
+}
+
+TEST_F(DiskImage, WhoseSignatureEndsAsFarAsNumbersGoIsRefusedAloud) {
+    constexpr std::uint64_t kHuge = std::numeric_limits<std::uint64_t>::max();
+    EXPECT_EQ(
+        linesOfReading(DiskImageBuilder().codeSignOffset(2).codeSignLength(kHuge - 2), 66),
+        (Lines{codesignLine(2, kHuge - 2),
+               "In a good disk image, the stored code signature end MUST match the UDIF header start. It "
+               "currently doesn't. (18446744073709551615 vs 1000)"}));
+}
+
+TEST_F(DiskImage, WhoseSignatureDoesNotEndAtTheTrailerIsRefused) {
+    const Data superblob = emptySuperblob();
+    for (const std::uint64_t length : {11U, 13U}) {
+        EXPECT_EQ(
+            linesOfReading(DiskImageBuilder().superblob(superblob).codeSignLength(length), 66),
+            (Lines{codesignLine(1000, length),
+                   foundation::format("In a good disk image, the stored code signature end MUST match the "
+                                      "UDIF header start. It currently doesn't. (%llu vs 1012)",
+                                      1000 + length)}));
+    }
+    EXPECT_EQ(platform.files.count("handle.read"), 2U) << "only the trailers should have been read";
+}
+
+TEST_F(DiskImage, WhoseSuperblobCannotBeReadIsRefused) {
+    for (const std::size_t operation : {4U, 5U}) {
+        test::RecordingFileManager& files = platform.files;
+        files.failOperation(files.operations().size() + operation, EIO);
+        const Lines lines = linesOfReading(DiskImageBuilder().superblob(emptySuperblob()), 66);
+        ASSERT_EQ(lines.size(), 2U);
+        EXPECT_EQ(lines[1].find(
+                      "Could read code signature header of image.dmg. This should not have happened. Can"),
+                  0U);
+    }
+}
+
+TEST_F(DiskImage, WhoseSuperblobIsReadShortIsRefusedInSilence) {
+    platform.files.cutRead(5, 11);
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(emptySuperblob()), 66),
+              Lines{codesignLine(1000, 12)});
+}
+
+TEST_F(DiskImage, WithoutASyntheticHashIsRefusedWithTheStatus) {
+    platform.codeSigning.addStatus = -36;
+    const Lines lines = linesOfReading(DiskImageBuilder(), 66);
+    ASSERT_EQ(lines.size(), 3U);
+    EXPECT_EQ(lines[2], "synthetic cdHash generation failed. -36");
+}
+
+TEST_F(DiskImage, WhoseSigningGivesNoHashIsAcceptedWithoutOne) {
+    platform.codeSigning.detachedInformation = codesign::SigningInformation{};
+    put(DiskImageBuilder());
+    auto image = open();
+    EXPECT_EQ(image.appropriateExitCode(), 0);
+    EXPECT_EQ(image.syntheticCDHash(), std::nullopt);
+    EXPECT_EQ(image.digestAlgorithm(), 0U);
+    EXPECT_EQ(image.cdHash(), std::nullopt);
+}
+
+TEST_F(DiskImage, WithAnotherSuperblobMagicIsRefusedWithItsBytesAsALittleEndianNumber) {
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(SuperBlobBuilder().magic(0xFADE0CC1)), 66),
+              (Lines{codesignLine(1000, 12), "Not a supported code signature block, -1056121094"}));
+}
+
+TEST_F(DiskImage, WithMoreBlobsThanFitIsRefusedWithTheBoundFirstAndTheCountLast) {
+    const auto builder = SuperBlobBuilder().blob(2, makeBlob(0xFADE0C01, Data(12))).count(3);
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(builder), 66),
+              (Lines{codesignLine(1000, 40), "Stored Codesign length: 40 number of blobs: 3",
+                     "2 blobs in image.dmg exceeds the maximum possible number of blobs, 3"}));
+}
+
+TEST_F(DiskImage, WhoseSuperblobStatesAnotherLengthIsRefused) {
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(SuperBlobBuilder().length(13)), 66),
+              (Lines{codesignLine(1000, 12), "Stored Codesign length: 13 number of blobs: 0",
+                     "The code signature block must be 12 bytes in length. However, it is 13."}));
+}
+
+TEST_F(DiskImage, WhoseSuperblobIsShorterThanAHeaderTakesTheRestForZero) {
+    Data magicAlone = emptySuperblob();
+    magicAlone.resize(4);
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(magicAlone), 66),
+              (Lines{codesignLine(1000, 4), "Stored Codesign length: 0 number of blobs: 0",
+                     "The code signature block must be 4 bytes in length. However, it is 0."}));
+}
+
+TEST_F(DiskImage, WithTwoEqualIndexEntriesIsRefused) {
+    const Data blob = makeBlob(0xFADE0C01, Data(4));
+    const auto builder = SuperBlobBuilder().blob(2, blob).blob(2, blob).offsetOf(2, 28);
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(builder), 66).back(),
+              "Did not find 2 unique blobs in the code signing data.");
+}
+
+TEST_F(DiskImage, WhoseIndexIsOutOfFileOrderIsRefused) {
+    const Lines lines =
+        linesOfReading(DiskImageBuilder().superblob(DiskImageBuilder::signature().reverseIndex()), 66);
+    ASSERT_EQ(lines.size(), 4U);
+    EXPECT_EQ(lines[2].find("Calculated length ("), 0U);
+    EXPECT_EQ(lines[3].find("Length of all blobs ("), 0U);
+}
+
+TEST_F(DiskImage, WhoseBlobsLeaveAGapIsRefused) {
+    const auto builder = SuperBlobBuilder().gap(4).blob(2, makeBlob(0xFADE0C01, Data(4)));
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(builder), 66).back(),
+              "Length of all blobs (32) did not match length of code signing data (36).");
+}
+
+TEST_F(DiskImage, WithAnIndexEntryThatLeadsNowhereIsRefused) {
+    const auto builder = SuperBlobBuilder().blob(2, makeBlob(0xFADE0C01, Data(4))).offsetOf(2, 0xFFFFFFFF);
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(builder), 66).back(),
+              "Length of all blobs (20) did not match length of code signing data (32).");
+}
+
+TEST_F(DiskImage, WhoseIndexReachesBehindTheSuperblobIsRefused) {
+    Data cut = SuperBlobBuilder().count(1).length(16).build();
+    cut.resize(16);
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(cut), 66).back(),
+              "Did not find 1 unique blobs in the code signing data.");
+}
+
+TEST_F(DiskImage, WhoseLastBlobHasNoRoomForItsHeaderIsRefusedThoughAllIsFilled) {
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(SuperBlobBuilder().blob(2, {})), 66).back(),
+              "Total Length: 20 Found blobs: 0");
+}
+
+// A file that is a hole but for its trailer: it has as many bytes as its trailer likes.
+class SparseDiskImage : public DiskImage {
+  protected:
+    void putSparse(std::uint64_t signatureLength) {
+        test::writeFile(path, foundation::ByteView(Data(1000, std::byte{0xDA})));
+        std::filesystem::resize_file(path, 1000 + signatureLength);
+        const Data trailer =
+            DiskImageBuilder().codeSignOffset(1000).codeSignLength(signatureLength).trailer();
+        std::ofstream(path, std::ios::binary | std::ios::app) << foundation::toString(trailer);
+        ASSERT_EQ(std::filesystem::file_size(path), 1000 + signatureLength + 512);
+    }
+};
+
+TEST_F(SparseDiskImage, WithAGiantSuperblobIsRefusedInSilenceAndUnread) {
+    constexpr std::uint64_t kLength = 1ULL << 36;
+    putSparse(kLength);
+    EXPECT_EQ(linesOfReading(66), Lines{codesignLine(1000, kLength)});
+    EXPECT_EQ(platform.files.count("handle.read"), 1U);
+}
+
+TEST_F(SparseDiskImage, WithASuperblobJustOverTheLimitIsRefusedInSilenceAndUnread) {
+    putSparse(kMaximumSuperblobLength + 1);
+    EXPECT_EQ(linesOfReading(66), Lines{codesignLine(1000, kMaximumSuperblobLength + 1)});
+    EXPECT_EQ(platform.files.count("handle.read"), 1U);
+}
+
+TEST_F(SparseDiskImage, WithASuperblobAtTheLimitIsRead) {
+    putSparse(kMaximumSuperblobLength);
+    EXPECT_EQ(linesOfReading(66), (Lines{codesignLine(1000, kMaximumSuperblobLength),
+                                         "Not a supported code signature block, 0"}));
+}
+
+TEST_F(DiskImage, IsNeverReadInFrontOfItsSignature) {
+    put(DiskImageBuilder().superblob(DiskImageBuilder::signature()));
+    open();
+    EXPECT_EQ(platform.files.names(), (Lines{"openForReading", "handle.seekToEnd", "handle.seek",
+                                             "handle.read", "handle.seek", "handle.read"}));
+}
+
+TEST_F(DiskImage, AnswersItsTicketWithoutTheBlobsHeader) {
+    put(DiskImageBuilder().superblob(
+        DiskImageBuilder::signature().blob(0x10002, test::ticketBlob("TICKET"))));
+    EXPECT_EQ(open().ticketData(), foundation::toData("TICKET"));
+}
+
+TEST_F(DiskImage, WithoutATicketAnswersNone) {
+    put(DiskImageBuilder().superblob(DiskImageBuilder::signature()));
+    EXPECT_EQ(open().ticketData(), std::nullopt);
+    put(DiskImageBuilder());
+    EXPECT_EQ(open().ticketData(), std::nullopt);
+}
+
+TEST_F(DiskImage, WithTwoTicketsAnswersTheLaterOne) {
+    put(DiskImageBuilder().superblob(SuperBlobBuilder()
+                                         .blob(0x10002, test::ticketBlob("FIRST"))
+                                         .blob(0x10002, test::ticketBlob("SECOND"))));
+    EXPECT_EQ(open().ticketData(), foundation::toData("SECOND"));
+}
+
+TEST_F(DiskImage, KnowsItsTicketByTheSlotWhateverTheMagicIs) {
+    put(DiskImageBuilder().superblob(
+        SuperBlobBuilder().blob(0x10002, makeBlob(0x12345678, foundation::asBytes("TICKET")))));
+    EXPECT_EQ(open().ticketData(), foundation::toData("TICKET"));
+}
+
+TEST_F(DiskImage, HasNoTicketInABlobThatIsShorterThanItsHeader) {
+    // Two index entries overlap so that the first blob is 4 bytes long and says so.
+    const Data words = foundation::ByteWriter().be32(0xFADE0B01).be32(4).be32(8).data();
+    put(DiskImageBuilder().superblob(SuperBlobBuilder().blob(0x10002, words).blob(5, {}).offsetOf(5, 32)));
+    auto image = open();
+    ASSERT_EQ(image.appropriateExitCode(), 0);
+    EXPECT_EQ(image.blobs().size(), 2U);
+    EXPECT_EQ(image.ticketData(), std::nullopt);
+}
+
+TEST_F(DiskImage, SignedTakesHashAndAlgorithmFromItsCodeSignature) {
+    platform.codeSigning.validity = codesign::kSuccess;
+    platform.codeSigning.information.emplace();
+    platform.codeSigning.information->unique = Data(48, std::byte{0xAB});
+    platform.codeSigning.information->digestAlgorithm = 4;
+    put(DiskImageBuilder().superblob(DiskImageBuilder::signature()));
+    auto image = open();
+    const MessageCapture output(kVerbosityVerbose);
+    EXPECT_EQ(image.cdHash(), Data(48, std::byte{0xAB}));
+    EXPECT_EQ(image.digestAlgorithm(), 4U);
+    EXPECT_EQ(output.lines().front(), "Props are {");
+}
+
+TEST_F(DiskImage, UnsignedAnswersTheHashMadeWhileReading) {
+    put(DiskImageBuilder());
+    auto image = open();
+    platform.codeSigning.addStatus = -36;
+    EXPECT_EQ(image.cdHash(), syntheticHash());
+    EXPECT_EQ(image.digestAlgorithm(), 2U);
+}
+
+TEST_F(DiskImage, WithNothingButATicketMakesItsHashWhenAsked) {
+    put(DiskImageBuilder().superblob(SuperBlobBuilder().blob(0x10002, test::ticketBlob("TICKET"))));
+    auto image = open();
+    EXPECT_EQ(image.digestAlgorithm(), 0U);
+    EXPECT_EQ(image.cdHash(), syntheticHash());
+    EXPECT_EQ(image.digestAlgorithm(), 2U);
+    EXPECT_EQ(image.syntheticCDHash(), std::nullopt);
+}
+
+TEST_F(DiskImage, WhoseHashCannotBeMadeWhenAskedHasNone) {
+    put(DiskImageBuilder().superblob(SuperBlobBuilder().blob(0x10002, test::ticketBlob("TICKET"))));
+    auto image = open();
+    platform.codeSigning.addStatus = -36;
+    const MessageCapture output(kVerbosityVerbose);
+    EXPECT_EQ(image.cdHash(), std::nullopt);
+    EXPECT_EQ(output.lines().back(), "Generating a synthetic cdHash for image.dmg failed. -36");
+    EXPECT_EQ(image.appropriateExitCode(), 0);
+}
+
+}  // namespace
+}  // namespace pinwell

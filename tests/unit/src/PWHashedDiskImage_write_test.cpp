@@ -1,0 +1,447 @@
+// Writing: a ticket's way into an image, and out of it.
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <filesystem>
+
+#include "disk_image_fixture.h"
+#include "foundation/byte_writer.h"
+
+namespace pinwell {
+namespace {
+
+using foundation::ByteWriter;
+using foundation::Data;
+using test::DiskImageBuilder;
+using test::Lines;
+using test::MessageCapture;
+using test::SuperBlobBuilder;
+using test::ticketBlob;
+
+SuperBlobBuilder stapled(std::string_view ticket) {
+    return SuperBlobBuilder().blob(0x10002, ticketBlob(ticket));
+}
+
+SuperBlobBuilder signedAndStapled(std::string_view ticket) {
+    return DiskImageBuilder::signature().blob(0x10002, ticketBlob(ticket));
+}
+
+class DiskImageWriting : public test::DiskImageTest {
+  protected:
+    // One call of the hook on the image as `builder` makes it.
+    bool write(const DiskImageBuilder& builder, std::string_view ticket) {
+        test::writeFile(directory / "new.ticket", ticket);
+        return run(builder, source, false);
+    }
+    bool erase(const DiskImageBuilder& builder) { return run(builder, std::nullopt, true); }
+
+    bool run(const DiskImageBuilder& builder, const std::optional<URL>& from, bool deleteExisting) {
+        put(builder);
+        auto image = open();
+        image.setAppropriateExitCode(1);
+        const MessageCapture output(kVerbosityVerbose);
+        const bool done = image._writeNewTicketDataFromURL(from, url, deleteExisting, &error);
+        lines = output.lines();
+        exitCode = image.appropriateExitCode();
+        header = foundation::toData(image.dmgHeader().bytes());
+        return done;
+    }
+
+    std::vector<std::string> debugCopies() const {
+        std::vector<std::string> paths;
+        for (const auto& entry : std::filesystem::directory_iterator(directory / "tmp"))
+            paths.push_back(entry.path().string());
+        return paths;
+    }
+    bool printedTruncation() const {
+        return std::any_of(lines.begin(), lines.end(),
+                           [](const std::string& line) { return line.find("Truncating ") == 0; });
+    }
+    void expectFailedWith73AndUntouched(const DiskImageBuilder& before) const {
+        EXPECT_EQ(exitCode, 73);
+        EXPECT_EQ(contents(), contentsOf(before));
+        EXPECT_TRUE(platform.files.changes().empty());
+    }
+
+    const URL source = directory.url("new.ticket");
+    std::optional<Error> error = Error::osStatus(1);  // what the caller had in it
+    Lines lines;
+    std::int32_t exitCode = 0;
+    Data header;
+};
+
+TEST_F(DiskImageWriting, PutsASuperblobOf28BytesAndTheTicketInFrontOfAnUnsignedImagesTrailer) {
+    ASSERT_TRUE(write(DiskImageBuilder(), "TICKET"));
+    const Data superblob = ByteWriter()
+                               .be32(0xFADE0CC0)
+                               .be32(34)
+                               .be32(1)
+                               .be32(0x10002)
+                               .be32(20)
+                               .be32(0xFADE0B01)
+                               .be32(14)
+                               .text("TICKET")
+                               .data();
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(superblob)));
+    EXPECT_EQ(contents().size(), 1000U + 34 + 512);
+    EXPECT_EQ(header, DiskImageBuilder().codeSignOffset(1000).codeSignLength(34).trailer());
+    EXPECT_EQ(exitCode, 0);
+    EXPECT_EQ(error, Error::osStatus(1));
+    EXPECT_FALSE(printedTruncation());
+}
+
+TEST_F(DiskImageWriting, AppendsTheTicketToASignedImagesBlobsWhichMoveBy8) {
+    const Data before = DiskImageBuilder::signature().build();
+    ASSERT_TRUE(write(DiskImageBuilder().superblob(before), "TICKET"));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(signedAndStapled("TICKET"))));
+    EXPECT_EQ(contents().size(), 1000 + before.size() + 8 + 14 + 512);
+    EXPECT_EQ(slotTypeOf(open().blobs().back()), 0x10002U);
+    EXPECT_EQ(open().blobs()[0].at("offset"), foundation::Value(44U));
+    EXPECT_FALSE(printedTruncation());
+}
+
+TEST_F(DiskImageWriting, TakesATicketOf1Byte) {
+    ASSERT_TRUE(write(DiskImageBuilder(), "T"));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(stapled("T"))));
+    EXPECT_EQ(lines[0], "Adding 1 blobs to superblob. What about Blob?");
+    EXPECT_EQ(lines[1], "Length of new ticket blob is 9");
+}
+
+TEST_F(DiskImageWriting, ReplacesATicketByALongerOneWithoutTruncating) {
+    ASSERT_TRUE(write(DiskImageBuilder().superblob(signedAndStapled("OLD")), "A LONGER ONE"));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(signedAndStapled("A LONGER ONE"))));
+    EXPECT_FALSE(printedTruncation());
+}
+
+TEST_F(DiskImageWriting, ReplacesATicketByOneOfTheSameLengthWithoutTruncating) {
+    ASSERT_TRUE(write(DiskImageBuilder().superblob(stapled("OLD")), "NEW"));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(stapled("NEW"))));
+    EXPECT_FALSE(printedTruncation());
+}
+
+TEST_F(DiskImageWriting, ReplacesATicketByAShorterOneAndSaysThatItTruncates) {
+    ASSERT_TRUE(write(DiskImageBuilder().superblob(stapled("A LONG OLD ONE")), "NEW"));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(stapled("NEW"))));
+    EXPECT_EQ(lines.back(), "Truncating image.dmg from to 1554 bytes to 1543 bytes.");
+}
+
+TEST_F(DiskImageWriting, DropsBothOfTwoTickets) {
+    ASSERT_TRUE(write(DiskImageBuilder().superblob(stapled("ONE").blob(0x10002, ticketBlob("TWO"))), "NEW"));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(stapled("NEW"))));
+}
+
+TEST_F(DiskImageWriting, PutsATicketThatStoodFirstLast) {
+    const Data requirements = test::emptyRequirements();
+    ASSERT_TRUE(write(DiskImageBuilder().superblob(stapled("OLD").blob(2, requirements)), "NEW"));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(
+                              SuperBlobBuilder().blob(2, requirements).blob(0x10002, ticketBlob("NEW")))));
+}
+
+TEST_F(DiskImageWriting, SaysWhatItDoes) {
+    ASSERT_TRUE(
+        write(DiskImageBuilder().superblob(stapled("OLDER").blob(2, test::emptyRequirements())), "NEW"));
+    ASSERT_EQ(debugCopies().size(), 1U);
+    EXPECT_EQ(lines, (Lines{"Adding 2 blobs to superblob. What about Blob?",
+                            "Adding blob of size 12 to offset 28.", "Length of new ticket blob is 11",
+                            "A copy of the new disk image blobs and headers has been saved to " +
+                                debugCopies()[0] + ". Enjoy.",
+                            "Truncating image.dmg from to 1565 bytes to 1563 bytes."}));
+}
+
+TEST_F(DiskImageWriting, TouchesTheImageWithOneSeekAndOneWriteAndFlushesIt) {
+    ASSERT_TRUE(write(DiskImageBuilder().superblob(stapled("A LONG OLD ONE")), "NEW"));
+    const auto names = platform.files.names();
+    const auto opened = std::find(names.begin(), names.end(), "openForUpdating");
+    EXPECT_EQ(Lines(opened, names.end()),
+              (Lines{"openForUpdating", "handle.seek", "handle.write", "handle.position", "handle.truncate",
+                     "handle.synchronize", "handle.close"}));
+}
+
+TEST_F(DiskImageWriting, KeepsDescribingTheFileAsItWasRead) {
+    put(DiskImageBuilder().superblob(stapled("OLD")));
+    test::writeFile(directory / "new.ticket", std::string_view("NEWER"));
+    auto image = open();
+    EXPECT_EQ(image.ticketData(), foundation::toData("OLD"));
+    ASSERT_TRUE(image._writeNewTicketDataFromURL(source, url, false, nullptr));
+    EXPECT_EQ(image.superblob(), stapled("OLD").build());
+    EXPECT_EQ(image.csLength(), 31U);
+    EXPECT_EQ(image.ticketData(), foundation::toData("OLD"));
+    EXPECT_EQ(open().ticketData(), foundation::toData("NEWER"));
+}
+
+TEST_F(DiskImageWriting, DeletesTheTicketOfASignedImage) {
+    const Data before = signedAndStapled("TICKET").build();
+    ASSERT_TRUE(erase(DiskImageBuilder().superblob(before)));
+    const Data after = DiskImageBuilder::signature().build();
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(after)));
+    EXPECT_EQ(before.size() - after.size(), 14U + 8);
+    EXPECT_EQ(lines[1].substr(lines[1].find(" to offset")), " to offset 36.");
+    EXPECT_EQ(lines.back(), foundation::format("Truncating image.dmg from to %tu bytes to %tu bytes.",
+                                               1000 + before.size() + 512, 1000 + after.size() + 512));
+    EXPECT_EQ(exitCode, 0);
+}
+
+TEST_F(DiskImageWriting, DeletesNothingWhenTheTicketIsTheOnlyBlobAndSucceeds) {
+    const auto image = DiskImageBuilder().superblob(stapled("TICKET"));
+    EXPECT_TRUE(erase(image));
+    EXPECT_EQ(contents(), contentsOf(image));
+    EXPECT_TRUE(platform.files.changes().empty());
+    EXPECT_EQ(lines, Lines{"Adding 0 blobs to superblob. What about Blob?"});
+    EXPECT_EQ(header, image.trailer());
+    EXPECT_EQ(exitCode, 0);
+}
+
+TEST_F(DiskImageWriting, RefusesToDeleteATicketThatIsNotThere) {
+    const auto image = DiskImageBuilder().superblob(DiskImageBuilder::signature());
+    EXPECT_FALSE(erase(image));
+    EXPECT_EQ(lines, Lines{"Cannot delete an existing ticket in image.dmg that doesn't exist."});
+    EXPECT_EQ(error, std::nullopt);
+    expectFailedWith73AndUntouched(image);
+}
+
+TEST_F(DiskImageWriting, RefusesToDeleteATicketWithoutAnyBytes) {
+    const auto image =
+        DiskImageBuilder().superblob(DiskImageBuilder::signature().blob(0x10002, ticketBlob("")));
+    EXPECT_FALSE(erase(image));
+    EXPECT_EQ(lines, Lines{"Cannot delete an existing ticket in image.dmg that doesn't exist."});
+    expectFailedWith73AndUntouched(image);
+}
+
+TEST_F(DiskImageWriting, RefusesATicketFileThatCannotBeRead) {
+    platform.files.fail("contentsOfFile", EACCES);
+    EXPECT_FALSE(write(DiskImageBuilder(), "TICKET"));
+    ASSERT_EQ(lines.size(), 1U);
+    EXPECT_EQ(lines[0].find("Cannot add a new ticket to image.dmg. Error Domain=POSIXErrorDomain Code=13 "),
+              0U);
+    ASSERT_TRUE(error.has_value());
+    EXPECT_EQ(error->code(), EACCES);
+    expectFailedWith73AndUntouched(DiskImageBuilder());
+}
+
+TEST_F(DiskImageWriting, RefusesAnEmptyTicket) {
+    EXPECT_FALSE(write(DiskImageBuilder(), ""));
+    EXPECT_EQ(lines, Lines{"Cannot add a new ticket to image.dmg. (null)"});
+    EXPECT_EQ(error, std::nullopt);
+    expectFailedWith73AndUntouched(DiskImageBuilder());
+}
+
+TEST_F(DiskImageWriting, RefusesToWriteWithoutASource) {
+    EXPECT_FALSE(run(DiskImageBuilder(), std::nullopt, false));
+    EXPECT_EQ(lines, Lines{"Cannot add a new ticket to image.dmg. (null)"});
+    EXPECT_EQ(error, std::nullopt);
+    expectFailedWith73AndUntouched(DiskImageBuilder());
+}
+
+TEST_F(DiskImageWriting, RefusesATicketOf4GiB) {
+    test::writeFile(directory / "huge.ticket", std::string_view());
+    std::filesystem::resize_file(directory / "huge.ticket", 1ULL << 32);
+    EXPECT_FALSE(run(DiskImageBuilder(), directory.url("huge.ticket"), false));
+    ASSERT_EQ(lines.size(), 1U);
+    EXPECT_EQ(lines[0].find("Cannot add a new ticket to image.dmg. "), 0U);
+    expectFailedWith73AndUntouched(DiskImageBuilder());
+}
+
+TEST_F(DiskImageWriting, IgnoresTheSourceWhenDeleting) {
+    EXPECT_TRUE(run(DiskImageBuilder().superblob(signedAndStapled("TICKET")), directory.url("none"), true));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(DiskImageBuilder::signature())));
+}
+
+TEST_F(DiskImageWriting, LeavesAPrivateCopyOfWhatItWritesEachTime) {
+    ASSERT_TRUE(write(DiskImageBuilder(), "TICKET"));
+    ASSERT_EQ(debugCopies().size(), 1U);
+    const std::string copy = debugCopies()[0];
+    EXPECT_TRUE(copy.ends_with(".dmgData"));
+    EXPECT_EQ(test::readFile(copy), contents().substr(1000));
+    struct stat status = {};
+    ASSERT_EQ(stat(copy.c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 07777U, 0600U);
+    ASSERT_TRUE(write(DiskImageBuilder(), "TICKET"));
+    EXPECT_EQ(debugCopies().size(), 2U);
+}
+
+TEST_F(DiskImageWriting, SavesTheCopyBeforeItOpensTheImage) {
+    ASSERT_TRUE(write(DiskImageBuilder(), "TICKET"));
+    const auto names = platform.files.names();
+    EXPECT_LT(std::find(names.begin(), names.end(), "writeFile"),
+              std::find(names.begin(), names.end(), "openForUpdating"));
+}
+
+TEST_F(DiskImageWriting, GoesOnInSilenceWhenTheCopyCannotBeSaved) {
+    platform.files.fail("writeFile", ENOSPC);
+    EXPECT_TRUE(write(DiskImageBuilder(), "TICKET"));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(stapled("TICKET"))));
+    EXPECT_EQ(lines.size(), 2U);
+    EXPECT_EQ(exitCode, 0);
+    EXPECT_EQ(error, Error::osStatus(1));
+}
+
+TEST_F(DiskImageWriting, HandsOutTheOpeningsErrorWhenTheImageCannotBeOpened) {
+    platform.files.fail("writeFile", ENOSPC);
+    platform.files.fail("openForUpdating", EROFS);
+    EXPECT_FALSE(write(DiskImageBuilder(), "TICKET"));
+    EXPECT_EQ(lines.back(), "All that work and I can't open image.dmg for writing.");
+    ASSERT_TRUE(error.has_value());
+    EXPECT_EQ(error->code(), EROFS);
+    EXPECT_EQ(exitCode, 73);
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder()));
+}
+
+TEST_F(DiskImageWriting, MayBeCalledWithoutAPlaceForTheError) {
+    put(DiskImageBuilder());
+    auto image = open();
+    EXPECT_FALSE(image._writeNewTicketDataFromURL(directory.url("none"), url, false, nullptr));
+    EXPECT_EQ(image.appropriateExitCode(), 73);
+}
+
+// Each operation on the image being written, made to fail.
+class FailingDiskImageWriting : public DiskImageWriting, public testing::WithParamInterface<const char*> {
+  protected:
+    FailingDiskImageWriting() {
+        // Reading comes first and must work: six operations, of which two are seeks.
+        const std::string operation = GetParam();
+        put(image);
+        const auto before = platform.files.operations().size();
+        test::writeFile(directory / "new.ticket", std::string_view("NEW"));
+        opened.emplace(url, platform.services());
+        platform.files.fail("handle." + operation, EIO);
+        EXPECT_EQ(platform.files.operations().size() - before, 6U);
+    }
+
+    bool run(bool deleteExisting) {
+        const MessageCapture output(kVerbosityVerbose);
+        const bool done = opened->_writeNewTicketDataFromURL(source, url, deleteExisting, &error);
+        lines = output.lines();
+        return done;
+    }
+    void expectFatalErrorWhile(const std::string& what) const {
+        ASSERT_FALSE(lines.empty());
+        const std::string start =
+            "Fatal error while " + what + " ticket to " + path + ". Cannot " + GetParam() + " ";
+        EXPECT_EQ(lines.back().substr(0, start.size()), start);
+        EXPECT_EQ(lines.back().back(), '.');
+        EXPECT_EQ(opened->appropriateExitCode(), 73);
+    }
+
+    const DiskImageBuilder image = DiskImageBuilder().superblob(signedAndStapled("A LONG OLD TICKET"));
+    std::optional<PWHashedDiskImage> opened;
+};
+
+INSTANTIATE_TEST_SUITE_P(AtEachOperation, FailingDiskImageWriting,
+                         testing::Values("seek", "write", "position", "truncate", "synchronize", "close"),
+                         [](const auto& test) { return std::string(test.param); });
+
+TEST_P(FailingDiskImageWriting, IsAFatalErrorOfWritingWithoutAnErrorToHandOut) {
+    EXPECT_FALSE(run(false));
+    expectFatalErrorWhile("writing new");
+    EXPECT_EQ(error, std::nullopt);
+}
+
+TEST_P(FailingDiskImageWriting, IsAFatalErrorOfDeleting) {
+    EXPECT_FALSE(run(true));
+    expectFatalErrorWhile("deleting existing");
+}
+
+TEST_P(FailingDiskImageWriting, HandsOutTheErrorOfTheCopyWhenThatFailedBefore) {
+    platform.files.fail("writeFile", ENOSPC);
+    EXPECT_FALSE(run(false));
+    expectFatalErrorWhile("writing new");
+    ASSERT_TRUE(error.has_value());
+    EXPECT_EQ(error->code(), ENOSPC);
+}
+
+TEST_P(FailingDiskImageWriting, LeavesAClonedImageAsItWas) {
+    platform.files.answerCloning(true);
+    EXPECT_FALSE(opened->writeNewTicketDataFromURL(source, &error));
+    EXPECT_EQ(opened->appropriateExitCode(), 73);
+    EXPECT_EQ(contents(), contentsOf(image));
+    EXPECT_EQ(platform.files.count("replaceItem"), 0U);
+    EXPECT_EQ(error, Error::osStatus(1));
+}
+
+class DiskImageReplacement : public DiskImageWriting, public testing::WithParamInterface<bool> {
+  protected:
+    DiskImageReplacement() {
+        platform.files.answerCloning(GetParam());
+        test::writeFile(directory / "new.ticket", std::string_view("NEW"));
+    }
+
+    std::size_t swaps() const { return platform.files.count("replaceItem"); }
+    static std::size_t expectedSwaps() { return GetParam() ? 1U : 0U; }
+};
+
+INSTANTIATE_TEST_SUITE_P(Cloning, DiskImageReplacement, testing::Bool(),
+                         [](const auto& test) { return test.param ? "On" : "Off"; });
+
+TEST_P(DiskImageReplacement, StaplesThroughTheDriver) {
+    put(DiskImageBuilder().superblob(signedAndStapled("A LONG OLD ONE")));
+    EXPECT_TRUE(open().writeNewTicketDataFromURL(source, nullptr));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(signedAndStapled("NEW"))));
+    EXPECT_EQ(swaps(), expectedSwaps());
+}
+
+TEST_P(DiskImageReplacement, DeletesThroughTheDriver) {
+    put(DiskImageBuilder().superblob(signedAndStapled("OLD")));
+    EXPECT_TRUE(open()._deleteExistingTicket(nullptr));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(DiskImageBuilder::signature())));
+    EXPECT_EQ(swaps(), expectedSwaps());
+}
+
+TEST_P(DiskImageReplacement, DeletingTheOnlyBlobThroughTheDriverKeepsIt) {
+    put(DiskImageBuilder().superblob(stapled("OLD")));
+    auto image = open();
+    EXPECT_TRUE(image._deleteExistingTicket(nullptr));
+    EXPECT_EQ(image.appropriateExitCode(), 0);
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(stapled("OLD"))));
+}
+
+TEST_P(DiskImageReplacement, DeletingWhatIsNotThereThroughTheDriverFails) {
+    put(DiskImageBuilder());
+    auto image = open();
+    EXPECT_FALSE(image._deleteExistingTicket(nullptr));
+    EXPECT_EQ(image.appropriateExitCode(), 73);
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder()));
+}
+
+// With the code-signing service of this machine.
+class CodeSignedDiskImage : public DiskImageWriting {
+  protected:
+    std::optional<Data> staple(std::string_view ticket) {
+        test::writeFile(directory / "new.ticket", ticket);
+        EXPECT_TRUE(reopen()->writeNewTicketDataFromURL(source, nullptr));
+        const auto image = reopen();
+        EXPECT_EQ(image->ticketData(), foundation::toData(ticket));
+        return image->cdHash();
+    }
+    std::shared_ptr<PWHashedFile> reopen() {
+        return PWHashedFile::initWithFileURL(url, platform.servicesWith(*service));
+    }
+
+    std::unique_ptr<codesign::CodeSigningService> service = codesign::makeCodeSigningService();
+};
+
+TEST_F(CodeSignedDiskImage, KeepsItsSyntheticHashAndItsDataThroughEveryStaple) {
+    put(DiskImageBuilder());
+    const auto hash = reopen()->cdHash();
+    ASSERT_TRUE(hash.has_value());
+    EXPECT_EQ(hash->size(), 20U);
+    for (const std::string_view ticket : {"TICKET", "A LONGER TICKET", "T"}) {
+        EXPECT_EQ(staple(ticket), hash);
+        EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(stapled(ticket))));
+    }
+    const auto image = reopen();
+    EXPECT_EQ(image->cdHash(), hash);
+    EXPECT_EQ(image->digestAlgorithm(), 2U);
+}
+
+TEST_F(CodeSignedDiskImage, KeepsItsSignaturesHashAndValidityThroughEveryStaple) {
+    put(DiskImageBuilder().superblob(DiskImageBuilder::signature()));
+    const Data hash = test::codeHashOf(2, DiskImageBuilder::codeDirectory());
+    EXPECT_EQ(reopen()->cdHash(), hash);
+    for (const std::string_view ticket : {"TICKET", "A LONGER TICKET", "T"}) EXPECT_EQ(staple(ticket), hash);
+    EXPECT_TRUE(reopen()->_deleteExistingTicket(nullptr));
+    EXPECT_EQ(reopen()->cdHash(), hash);
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(DiskImageBuilder::signature())));
+}
+
+}  // namespace
+}  // namespace pinwell

@@ -1,0 +1,221 @@
+#include "src/PWHashedFile/blob_set.h"
+
+#include <gtest/gtest.h>
+
+#include "foundation/byte_writer.h"
+#include "src/messages.h"
+#include "support/disk_image_builder.h"
+#include "support/message_capture.h"
+
+namespace pinwell {
+namespace {
+
+using foundation::ByteWriter;
+using foundation::Data;
+using foundation::toData;
+using foundation::Value;
+using test::makeBlob;
+using test::MessageCapture;
+using test::SuperBlobBuilder;
+using Lines = std::vector<std::string>;
+
+Data first() {
+    return makeBlob(0xFADE0C02, Data(12, std::byte{1}));
+}  // 20 bytes
+Data second() {
+    return makeBlob(0xFADE0C01, Data(4, std::byte{2}));
+}  // 12 bytes
+
+SuperBlobBuilder twoBlobs() {
+    return SuperBlobBuilder().blob(0, first()).blob(2, second());
+}
+
+struct Outcome {
+    std::optional<BlobSet> blobs;
+    Lines lines;
+};
+
+Outcome read(const Data& superblob, std::uint32_t count) {
+    const MessageCapture output(kVerbosityVerbose);
+    auto blobs = orderedBlobSetForSuperBlob(superblob, count);
+    return {std::move(blobs), output.lines()};
+}
+
+TEST(BlobSet, HasARecordOfExactlyFiveKeysForEachBlobInIndexOrder) {
+    const auto [blobs, lines] = read(twoBlobs().build(), 2);
+    ASSERT_TRUE(blobs.has_value());
+    ASSERT_EQ(blobs->size(), 2U);
+    EXPECT_EQ((*blobs)[0], (BlobRecord{{"cs slot type", Value(0U)},
+                                       {"offset", Value(28U)},
+                                       {"length", Value(20U)},
+                                       {"data", Value(first())},
+                                       {"magic", Value(0xFADE0C02U)}}));
+    EXPECT_EQ((*blobs)[1], (BlobRecord{{"cs slot type", Value(2U)},
+                                       {"offset", Value(48U)},
+                                       {"length", Value(12U)},
+                                       {"data", Value(second())},
+                                       {"magic", Value(0xFADE0C01U)}}));
+    EXPECT_EQ(lines, Lines{"Total Length: 60 Found blobs: 2"});
+}
+
+TEST(BlobSet, OfTheEmptySuperblobIsEmpty) {
+    EXPECT_EQ(emptySuperblob(), ByteWriter().be32(0xFADE0CC0).be32(12).be32(0).data());
+    const auto [blobs, lines] = read(emptySuperblob(), 0);
+    EXPECT_EQ(blobs, BlobSet{});
+    EXPECT_EQ(lines, Lines{"Total Length: 12 Found blobs: 0"});
+}
+
+TEST(BlobSet, RefusesTwoEqualIndexEntries) {
+    const Data superblob = SuperBlobBuilder().blob(2, second()).blob(2, second()).offsetOf(2, 28).build();
+    const auto [blobs, lines] = read(superblob, 2);
+    EXPECT_EQ(blobs, std::nullopt);
+    EXPECT_EQ(lines, Lines{"Did not find 2 unique blobs in the code signing data."});
+}
+
+TEST(BlobSet, TellsTwoBlobsOfOneSlotApart) {
+    const auto [blobs, lines] = read(SuperBlobBuilder().blob(2, second()).blob(2, second()).build(), 2);
+    ASSERT_TRUE(blobs.has_value());
+    EXPECT_EQ(blobs->size(), 2U);
+}
+
+TEST(BlobSet, RefusesAnIndexOutOfFileOrder) {
+    const auto [blobs, lines] = read(twoBlobs().reverseIndex().build(), 2);
+    EXPECT_EQ(blobs, std::nullopt);
+    EXPECT_EQ(lines,
+              (Lines{"Calculated length (18446744073709551596) does not match embedded blob length (12)",
+                     "Length of all blobs (28) did not match length of code signing data (60)."}));
+}
+
+TEST(BlobSet, RefusesAGapBetweenBlobs) {
+    const Data superblob = SuperBlobBuilder().blob(0, first()).gap(4).blob(2, second()).build();
+    const auto [blobs, lines] = read(superblob, 2);
+    EXPECT_EQ(blobs, std::nullopt);
+    EXPECT_EQ(lines, (Lines{"Calculated length (24) does not match embedded blob length (20)",
+                            "Length of all blobs (28) did not match length of code signing data (64)."}));
+}
+
+TEST(BlobSet, RefusesAGapBehindTheIndex) {
+    const Data superblob = SuperBlobBuilder().gap(4).blob(0, first()).blob(2, second()).build();
+    const auto [blobs, lines] = read(superblob, 2);
+    EXPECT_EQ(blobs, std::nullopt);
+    EXPECT_EQ(lines, Lines{"Length of all blobs (60) did not match length of code signing data (64)."});
+}
+
+TEST(BlobSet, RefusesBytesBehindTheLastBlob) {
+    Data superblob = twoBlobs().build();
+    superblob.push_back(std::byte{0});
+    const auto [blobs, lines] = read(superblob, 2);
+    EXPECT_EQ(blobs, std::nullopt);
+    EXPECT_EQ(lines, (Lines{"Calculated length (13) does not match embedded blob length (12)",
+                            "Length of all blobs (48) did not match length of code signing data (61)."}));
+}
+
+TEST(BlobSet, IsShorterThanTheCountWhenTheBlobsBeforeAWrongOneFillTheSuperblob) {
+    // The second entry leads to the superblob's end, where there is no room even for a header.
+    const Data superblob = SuperBlobBuilder().blob(0, first()).blob(2, {}).build();
+    const auto [blobs, lines] = read(superblob, 2);
+    ASSERT_TRUE(blobs.has_value());
+    EXPECT_EQ(blobs->size(), 1U);
+    EXPECT_EQ(lines, Lines{"Total Length: 48 Found blobs: 1"});
+}
+
+TEST(BlobSet, RefusesABlobThatBeginsBehindTheSuperblob) {
+    const auto [blobs, lines] = read(SuperBlobBuilder().blob(2, second()).offsetOf(2, 0xFFFFFFF0).build(), 1);
+    EXPECT_EQ(blobs, std::nullopt);
+    EXPECT_EQ(lines, Lines{"Length of all blobs (20) did not match length of code signing data (32)."});
+}
+
+TEST(BlobSet, RefusesABlobThatEndsBehindTheSuperblob) {
+    // Its own length (1000) agrees with the offsets (28 and 1028).
+    const Data overlong = ByteWriter().be32(0xFADE0C01).be32(1000).be32(0).data();
+    const auto [blobs, lines] =
+        read(SuperBlobBuilder().blob(2, overlong).blob(5, second()).offsetOf(5, 1028).build(), 2);
+    EXPECT_EQ(blobs, std::nullopt);
+    EXPECT_EQ(lines, Lines{"Length of all blobs (28) did not match length of code signing data (52)."});
+}
+
+TEST(BlobSet, RefusesAnIndexThatTheSuperblobIsTooShortFor) {
+    Data superblob = SuperBlobBuilder().count(1).build();
+    superblob.resize(16);
+    const auto [blobs, lines] = read(superblob, 1);
+    EXPECT_EQ(blobs, std::nullopt);
+    EXPECT_EQ(lines, Lines{"Did not find 1 unique blobs in the code signing data."});
+}
+
+SuperBlobBuilder blobsOfHeadersAlone(std::uint32_t count) {
+    SuperBlobBuilder builder;
+    for (std::uint32_t i = 0; i < count; ++i) builder.blob(i, makeBlob(0xFADE0C01, {}));
+    return builder;
+}
+
+TEST(BlobSet, HasAsManyBlobsAsTheLimitAndNoMore) {
+    const auto [most, lines] = read(blobsOfHeadersAlone(kMaximumBlobCount).build(), kMaximumBlobCount);
+    ASSERT_TRUE(most.has_value());
+    EXPECT_EQ(most->size(), kMaximumBlobCount);
+    EXPECT_EQ(read(blobsOfHeadersAlone(kMaximumBlobCount + 1).build(), kMaximumBlobCount + 1).blobs,
+              std::nullopt);
+}
+
+class SuperblobWithTicket : public testing::Test {
+  protected:
+    // What `superblob`, of `count` blobs, becomes.
+    Data rewritten(const Data& superblob, std::uint32_t count, std::string_view ticket) {
+        const auto blobs = orderedBlobSetForSuperBlob(superblob, count);
+        EXPECT_TRUE(blobs.has_value());
+        const MessageCapture output(kVerbosityVerbose);
+        Data result = superblobWithTicket(blobs.value_or(BlobSet{}), foundation::asBytes(ticket));
+        lines = output.lines();
+        return result;
+    }
+
+    Lines lines;
+};
+
+TEST_F(SuperblobWithTicket, HasTheTicketLastAndAllOthersAsTheyWere) {
+    EXPECT_EQ(rewritten(twoBlobs().build(), 2, "ticket"),
+              twoBlobs().blob(0x10002, test::ticketBlob("ticket")).build());
+    EXPECT_EQ(lines,
+              (Lines{"Adding 3 blobs to superblob. What about Blob?", "Adding blob of size 20 to offset 36.",
+                     "Adding blob of size 12 to offset 56.", "Length of new ticket blob is 14"}));
+}
+
+TEST_F(SuperblobWithTicket, OfOneByteHasABlobOf9) {
+    EXPECT_EQ(rewritten(emptySuperblob(), 0, "t"), ByteWriter()
+                                                       .be32(0xFADE0CC0)
+                                                       .be32(29)
+                                                       .be32(1)
+                                                       .be32(0x10002)
+                                                       .be32(20)
+                                                       .be32(0xFADE0B01)
+                                                       .be32(9)
+                                                       .text("t")
+                                                       .data());
+    EXPECT_EQ(lines,
+              (Lines{"Adding 1 blobs to superblob. What about Blob?", "Length of new ticket blob is 9"}));
+}
+
+TEST_F(SuperblobWithTicket, DropsEveryTicketThatWasThere) {
+    const Data old = SuperBlobBuilder()
+                         .blob(0x10002, test::ticketBlob("oldest"))
+                         .blob(2, second())
+                         .blob(0x10002, test::ticketBlob("old"))
+                         .build();
+    EXPECT_EQ(rewritten(old, 3, "new"),
+              SuperBlobBuilder().blob(2, second()).blob(0x10002, test::ticketBlob("new")).build());
+}
+
+TEST_F(SuperblobWithTicket, DroppedTakesItByItsSlotAndNotByItsMagic) {
+    const Data old = SuperBlobBuilder()
+                         .blob(0x10002, makeBlob(0x11111111, Data(5)))
+                         .blob(0x10000, makeBlob(0xFADE0B01, Data(3)))
+                         .build();
+    EXPECT_EQ(rewritten(old, 2, ""), SuperBlobBuilder().blob(0x10000, makeBlob(0xFADE0B01, Data(3))).build());
+}
+
+TEST_F(SuperblobWithTicket, DroppedFromItsOwnOnlyBlobIsNoSuperblobAtAll) {
+    EXPECT_EQ(rewritten(SuperBlobBuilder().blob(0x10002, test::ticketBlob("old")).build(), 1, ""), Data{});
+    EXPECT_EQ(lines, Lines{"Adding 0 blobs to superblob. What about Blob?"});
+}
+
+}  // namespace
+}  // namespace pinwell

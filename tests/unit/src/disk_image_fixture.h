@@ -1,0 +1,46 @@
+// An image in a directory of the test's own, on a platform whose code-signing service is a fake that takes
+// every image for unsigned and knows one synthetic cdhash.
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <filesystem>
+
+#include "src/PWHashedFile/PWHashedDiskImage.h"
+#include "src/messages.h"
+#include "support/disk_image_builder.h"
+#include "support/message_capture.h"
+#include "support/test_platform.h"
+
+namespace pinwell::test {
+
+using Lines = std::vector<std::string>;
+
+class DiskImageTest : public testing::Test {
+  protected:
+    DiskImageTest() {
+        std::filesystem::create_directory(directory / "tmp");
+        platform.codeSigning.validity = codesign::kUnsigned;
+        platform.codeSigning.detachedInformation.emplace();
+        platform.codeSigning.detachedInformation->cdHashes = {syntheticHash()};
+        platform.codeSigning.detachedInformation->digestAlgorithms = {2};
+    }
+
+    static foundation::Data syntheticHash() { return foundation::Data(20, std::byte{0xCD}); }
+
+    void put(const DiskImageBuilder& builder) { writeFile(path, foundation::ByteView(builder.build())); }
+    PWHashedDiskImage open() { return {url, platform.services()}; }
+
+    /// The image's bytes as they are now.
+    std::string contents() const { return readFile(path); }
+    static std::string contentsOf(const DiskImageBuilder& builder) {
+        return foundation::toString(builder.build());
+    }
+
+    TestPlatform platform;
+    const TemporaryDirectory& directory = platform.directory;
+    const std::string path = directory / "image.dmg";
+    const foundation::URL url = directory.url("image.dmg");
+};
+
+}  // namespace pinwell::test
