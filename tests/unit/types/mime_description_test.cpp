@@ -32,7 +32,9 @@ void describeAndExit(const Variables& variables, const std::string& name) {
 }
 
 void expectDescription(const Variables& variables, const std::string& name, const std::string& description) {
-    GTEST_FLAG_SET(death_test_style, "threadsafe");
+    // Forked, not started anew: the other style would make the test's directories again, and leave them
+    // behind.
+    GTEST_FLAG_SET(death_test_style, "fast");
     EXPECT_EXIT(describeAndExit(variables, name), testing::ExitedWithCode(0),
                 std::string(kDescribed) + description + "\n");
 }
