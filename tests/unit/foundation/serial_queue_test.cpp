@@ -109,7 +109,7 @@ TEST(SerialQueue, LetsWhatWorkOwnedHandInWorkAsItGoes) {
     int said = 0;
     {
         SerialQueue queue("owner");
-        queue.async([owned = std::make_shared<LastWord>(queue, said)] { (void)owned; });
+        queue.async([owned = std::shared_ptr<LastWord>(new LastWord{queue, said})] { (void)owned; });
     }
     EXPECT_EQ(said, 1);
 }

@@ -28,9 +28,9 @@ TEST(FileURL, KeepsParentComponentsSinceLinksDecideTheirMeaning) {
 
 TEST(FileURL, TakesRelativePathsAgainstTheCurrentDirectory) {
     const std::string current = std::filesystem::current_path().native();
-    EXPECT_EQ(tidied("x/y"), current + "/x/y");
+    EXPECT_EQ(tidied("x/y"), tidied(current + "/x/y"));
     EXPECT_EQ(tidied("."), current);
-    EXPECT_EQ(tidied("../x"), current + "/../x");
+    EXPECT_EQ(tidied("../x"), tidied(current + "/../x"));
 }
 
 TEST(FileURL, NeverHangsARelativePathBelowTheRoot) {

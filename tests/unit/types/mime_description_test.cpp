@@ -1,5 +1,6 @@
 // Descriptions under other languages and from other databases. The library reads the environment once, when
-// it is first asked, so each case runs in a process of its own.
+// it is first asked, so each case runs in a process of its own, forked before any other test asks: death
+// tests come first.
 #include <gtest/gtest.h>
 #include <sys/wait.h>
 #include <unistd.h>
