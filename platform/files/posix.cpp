@@ -98,7 +98,9 @@ Result<Data> readUpTo(const OpenFile& file, std::uint64_t length) {
     Data data;
     while (data.size() < length) {
         const std::size_t had = data.size();
-        data.resize(had + static_cast<std::size_t>(std::min<std::uint64_t>(length - had, kPieceSize)));
+        // Little at first: most files are small, and fresh memory costs more than another call.
+        const std::size_t piece = std::clamp(had, kFirstPieceSize, kPieceSize);
+        data.resize(had + static_cast<std::size_t>(std::min<std::uint64_t>(length - had, piece)));
         const ssize_t count =
             uninterrupted([&] { return ::read(file.number(), data.data() + had, data.size() - had); });
         if (count < 0) return lastError(file.path);

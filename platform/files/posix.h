@@ -18,6 +18,7 @@ using foundation::FileDescriptor;
 
 /// Largest piece that is read or written with one call, and so the most that memory grows by at a time.
 inline constexpr std::size_t kPieceSize = std::size_t{256} * 1024;
+inline constexpr std::size_t kFirstPieceSize = std::size_t{4} * 1024;
 
 /// The answer of `call`, made again for as long as a signal interrupts it.
 template <class Call>

@@ -8,21 +8,51 @@
 #include <memory>
 
 #include "files/posix.h"
+#include "foundation/lazy_library.h"
 
 namespace pinwell::files {
 namespace {
 
+// The library's functions, found when something is first trashed.
+struct Gio {
+    Gio() {
+        foundation::LazyLibrary library("libgio-2.0.so.0");
+        library.find(vfsGetLocal, "g_vfs_get_local");
+        library.find(vfsGetFileForPath, "g_vfs_get_file_for_path");
+        library.find(fileTrash, "g_file_trash");
+        library.find(objectUnref, "g_object_unref");
+        library.find(errorFree, "g_error_free");
+        library.find(quarkToString, "g_quark_to_string");
+        library.find(ioErrorQuark, "g_io_error_quark");
+        isThere = library.isComplete();
+    }
+
+    decltype(g_vfs_get_local)* vfsGetLocal = nullptr;
+    decltype(g_vfs_get_file_for_path)* vfsGetFileForPath = nullptr;
+    decltype(g_file_trash)* fileTrash = nullptr;
+    decltype(g_object_unref)* objectUnref = nullptr;
+    decltype(g_error_free)* errorFree = nullptr;
+    decltype(g_quark_to_string)* quarkToString = nullptr;
+    decltype(g_io_error_quark)* ioErrorQuark = nullptr;
+    bool isThere = false;
+};
+
+const Gio& gio() {
+    static const Gio functions;
+    return functions;
+}
+
 struct ObjectRelease {
-    void operator()(gpointer object) const noexcept { g_object_unref(object); }
+    void operator()(gpointer object) const noexcept { gio().objectUnref(object); }
 };
 struct ErrorRelease {
-    void operator()(GError* error) const noexcept { g_error_free(error); }
+    void operator()(GError* error) const noexcept { gio().errorFree(error); }
 };
 using FilePointer = std::unique_ptr<GFile, ObjectRelease>;
 using ErrorPointer = std::unique_ptr<GError, ErrorRelease>;
 
 int errnoOf(const GError& error) {
-    if (error.domain != G_IO_ERROR) return EIO;
+    if (error.domain != gio().ioErrorQuark()) return EIO;
     switch (error.code) {
         case G_IO_ERROR_NOT_FOUND:
             return ENOENT;
@@ -66,14 +96,15 @@ Result<std::string> moveToTrash(const std::string& path) {
     // Asked before as well: what could not be told afterwards is better not moved.
     if (const auto before = currentPath(item.get(), path); !before) return before.error();
 
+    if (!gio().isThere) return Error::posix(ENOSYS, path);
     // The local file system's own objects; the default ones may come from a desktop's modules.
-    const FilePointer file(g_vfs_get_file_for_path(g_vfs_get_local(), path.c_str()));
+    const FilePointer file(gio().vfsGetFileForPath(gio().vfsGetLocal(), path.c_str()));
     GError* failure = nullptr;
-    if (g_file_trash(file.get(), nullptr, &failure) == 0) {
+    if (gio().fileTrash(file.get(), nullptr, &failure) == 0) {
         const ErrorPointer owned(failure);
         return Error::posix(errnoOf(*owned), path)
             .with(foundation::kUnderlyingErrorKey,
-                  Error(g_quark_to_string(owned->domain), owned->code, owned->message));
+                  Error(gio().quarkToString(owned->domain), owned->code, owned->message));
     }
     return currentPath(item.get(), path);
 }

@@ -1,6 +1,7 @@
 #include "trust/trust_service.h"
 
 #include <algorithm>
+#include <array>
 #include <mutex>
 
 #include "foundation/format.h"
@@ -147,12 +148,33 @@ class ChainTrust final : public Trust {
     std::optional<std::string> policyError_;
 };
 
+/// The certificates parsed last. A run meets the same few again and again (the ticket that is stapled and the one that
+/// is downloaded, both policies of a server), and parsing one costs more than verifying its signature.
+class RecentCertificates {
+  public:
+    X509CertificateRef parse(ByteView der) {
+        const std::lock_guard lock(mutex_);
+        for (const X509CertificateRef& known : recent_)
+            if (known != nullptr && std::ranges::equal(known->der(), der)) return known;
+        X509CertificateRef parsed = X509Certificate::parse(der);
+        if (parsed != nullptr) recent_[next_++ % recent_.size()] = parsed;
+        return parsed;
+    }
+
+  private:
+    static constexpr std::size_t kKept = 16;
+
+    std::mutex mutex_;
+    std::array<X509CertificateRef, kKept> recent_;
+    std::size_t next_ = 0;
+};
+
 class X509TrustService final : public TrustService {
   public:
     X509TrustService(std::shared_ptr<Environment> environment, std::string securityLibrary)
         : environment_(std::move(environment)), securityLibrary_(std::move(securityLibrary)) {}
 
-    CertificateRef createCertificate(ByteView der) override { return X509Certificate::parse(der); }
+    CertificateRef createCertificate(ByteView der) override { return certificates_.parse(der); }
 
     NamedPolicyOutcome createNamedPolicy(const std::string& constructorName, PolicyRef& policy) override {
         return trust::createNamedPolicy(securityLibrary_, constructorName, policy);
@@ -184,6 +206,7 @@ class X509TrustService final : public TrustService {
   private:
     std::shared_ptr<Environment> environment_;
     std::string securityLibrary_;
+    RecentCertificates certificates_;
 };
 
 }  // namespace

@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "foundation/file_io.h"
+#include "foundation/lazy_library.h"
 
 namespace pinwell::types {
 namespace {
@@ -14,18 +15,51 @@ namespace {
 constexpr std::size_t kLongestExtension = 255;  // of any file name on the host
 constexpr std::size_t kLargestDescription = 256 * 1024;
 
+// The library's functions, found when an extension is first met that this platform does not declare itself.
+struct Gio {
+    Gio() {
+        foundation::LazyLibrary library("libgio-2.0.so.0");
+        library.find(contentTypeGuess, "g_content_type_guess");
+        library.find(contentTypeIsUnknown, "g_content_type_is_unknown");
+        library.find(freeText, "g_free");
+        library.find(parserNew, "g_markup_parse_context_new");
+        library.find(parserParse, "g_markup_parse_context_parse");
+        library.find(parserFree, "g_markup_parse_context_free");
+        library.find(userDataDirectory, "g_get_user_data_dir");
+        library.find(systemDataDirectories, "g_get_system_data_dirs");
+        isThere = library.isComplete();
+    }
+
+    decltype(g_content_type_guess)* contentTypeGuess = nullptr;
+    decltype(g_content_type_is_unknown)* contentTypeIsUnknown = nullptr;
+    decltype(g_free)* freeText = nullptr;
+    decltype(g_markup_parse_context_new)* parserNew = nullptr;
+    decltype(g_markup_parse_context_parse)* parserParse = nullptr;
+    decltype(g_markup_parse_context_free)* parserFree = nullptr;
+    decltype(g_get_user_data_dir)* userDataDirectory = nullptr;
+    decltype(g_get_system_data_dirs)* systemDataDirectories = nullptr;
+    bool isThere = false;
+};
+
+const Gio& gio() {
+    static const Gio functions;
+    return functions;
+}
+
 struct FreeText {
-    void operator()(char* text) const { g_free(text); }
+    void operator()(char* text) const { gio().freeText(text); }
 };
 struct FreeParser {
-    void operator()(GMarkupParseContext* context) const { g_markup_parse_context_free(context); }
+    void operator()(GMarkupParseContext* context) const { gio().parserFree(context); }
 };
+
+bool isLetterOrDigit(char c) { return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z'); }
 
 // "text/plain": two parts that can stand in a path.
 bool isWellFormed(std::string_view type) {
     const auto isPart = [](std::string_view part) {
         return !part.empty() && part.front() != '.' && std::all_of(part.begin(), part.end(), [](char c) {
-            return g_ascii_isalnum(c) || std::string_view("-+._").find(c) != std::string_view::npos;
+            return isLetterOrDigit(c) || std::string_view("-+._").find(c) != std::string_view::npos;
         });
     };
     const std::size_t slash = type.find('/');
@@ -57,16 +91,16 @@ std::string untranslatedComment(foundation::ByteView document) {
                                nullptr, nullptr};
     CommentReader reader;
     const std::unique_ptr<GMarkupParseContext, FreeParser> context(
-        g_markup_parse_context_new(&parser, GMarkupParseFlags{}, &reader, nullptr));
-    const bool parsed = g_markup_parse_context_parse(context.get(), text.data(),
+        gio().parserNew(&parser, GMarkupParseFlags{}, &reader, nullptr));
+    const bool parsed = gio().parserParse(context.get(), text.data(),
                                                      static_cast<gssize>(text.size()), nullptr) != FALSE;
     return parsed ? reader.comment : std::string();
 }
 
 // Where the database's parts are, the user's own first.
 std::vector<std::string> dataDirectories() {
-    std::vector<std::string> directories{g_get_user_data_dir()};
-    for (const char* const* directory = g_get_system_data_dirs(); *directory != nullptr; ++directory)
+    std::vector<std::string> directories{gio().userDataDirectory()};
+    for (const char* const* directory = gio().systemDataDirectories(); *directory != nullptr; ++directory)
         directories.emplace_back(*directory);
     return directories;
 }
@@ -77,18 +111,18 @@ std::optional<std::string> mimeTypeForExtension(std::string_view extension) {
     const bool canBeInAName = extension.find('\0') == std::string_view::npos &&
                               extension.find('/') == std::string_view::npos &&
                               extension.size() <= kLongestExtension;
-    if (!canBeInAName) return std::nullopt;
+    if (!canBeInAName || !gio().isThere) return std::nullopt;
     // No contents are handed over, and none are looked for: the library opens nothing by this name.
     const std::string name = "name." + std::string(extension);
-    const std::unique_ptr<char, FreeText> type(g_content_type_guess(name.c_str(), nullptr, 0, nullptr));
-    const bool isKnown = type != nullptr && !g_content_type_is_unknown(type.get()) &&
+    const std::unique_ptr<char, FreeText> type(gio().contentTypeGuess(name.c_str(), nullptr, 0, nullptr));
+    const bool isKnown = type != nullptr && !gio().contentTypeIsUnknown(type.get()) &&
                          std::string_view(type.get()) != "application/x-zerosize" && isWellFormed(type.get());
     if (!isKnown) return std::nullopt;
     return type.get();
 }
 
 std::optional<std::string> mimeDescription(const std::string& mimeType) {
-    if (!isWellFormed(mimeType)) return std::nullopt;
+    if (!isWellFormed(mimeType) || !gio().isThere) return std::nullopt;
     for (const std::string& directory : dataDirectories()) {
         const auto document =
             foundation::readSmallFile(directory + "/mime/" + mimeType + ".xml", kLargestDescription);
