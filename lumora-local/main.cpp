@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "foundation/format.h"
+#include "foundation/process.h"
 #include "lumora-local/commands.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/pinwell_artefact_hasher.h"
@@ -199,6 +200,7 @@ int run(int argc, char** argv) {
 }  // namespace
 
 int main(int argc, char** argv) {
+    foundation::occupyStandardStreams();
     // A client that has gone away is an error of one write, not the end of the service.
     std::signal(SIGPIPE, SIG_IGN);
     try {

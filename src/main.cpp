@@ -1,11 +1,9 @@
 // The entry point: options, the operation and the path, and the hand-off to the controller.
 
-#include <fcntl.h>
 #include <getopt.h>
 #include <malloc.h>
 #include <unistd.h>
 
-#include <cerrno>
 #include <csignal>
 #include <cstdlib>
 #include <string>
@@ -32,13 +30,6 @@ constexpr option options[] = {
     {"verbose", no_argument, nullptr, 'v'},
     {nullptr, 0, nullptr, 0},
 };
-
-// What is opened next takes the lowest free number: where a standard stream is closed, a connection or a file would
-// stand in its place and get the messages.
-void occupyStandardStreams() {
-    for (const int stream : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO})
-        if (::fcntl(stream, F_GETFD) < 0 && errno == EBADF) ::open("/dev/null", O_RDWR);
-}
 
 void printUsage() {
     const std::string program = foundation::processName();
@@ -99,7 +90,7 @@ int run(const URL& path) {
 int main(int argc, char** argv) {
     // The threads of a run take turns: a second heap would only be more fresh memory to fault in.
     mallopt(M_ARENA_MAX, 1);
-    occupyStandardStreams();
+    foundation::occupyStandardStreams();
     // A reader that has gone away must not stop a staple half-way.
     std::signal(SIGPIPE, SIG_IGN);
 

@@ -1,5 +1,6 @@
 #include "foundation/process.h"
 
+#include <fcntl.h>
 #include <fmt/format.h>
 #include <unistd.h>
 
@@ -21,6 +22,11 @@ constexpr std::size_t kLongestSafeName = 200;
 
 std::string processName() {
     return program_invocation_short_name;
+}
+
+void occupyStandardStreams() {
+    for (const int stream : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO})
+        if (fcntl(stream, F_GETFD) < 0 && errno == EBADF) open("/dev/null", O_RDWR);
 }
 
 std::string globallyUniqueString() {
