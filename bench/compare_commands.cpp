@@ -1,8 +1,8 @@
 // Times two commands against each other in one run: compare_commands RUNS LIMIT COMMAND... -- PEER...
 //
-// The two are run by turns, so that whatever else the machine does weighs on both alike. Prints the median wall time of
-// each and their ratio. Exits with 1 when the ratio is above LIMIT, 0 otherwise, and with 70 when a command could not
-// be run or ended otherwise than its first run did.
+// The two are run by turns, so that whatever else the machine does weighs on both alike. Prints the median
+// wall time of each and their ratio. Exits with 1 when the ratio is above LIMIT, 0 otherwise, and with 70
+// when a command could not be run or ended otherwise than its first run did.
 #include <fcntl.h>
 #include <spawn.h>
 #include <sys/wait.h>
@@ -36,7 +36,8 @@ class Contender {
     void run(bool counts) {
         posix_spawn_file_actions_t actions;
         posix_spawn_file_actions_init(&actions);
-        for (const int stream : {0, 1, 2}) posix_spawn_file_actions_addopen(&actions, stream, "/dev/null", O_RDWR, 0);
+        for (const int stream : {0, 1, 2})
+            posix_spawn_file_actions_addopen(&actions, stream, "/dev/null", O_RDWR, 0);
         const auto start = Clock::now();
         pid_t process = 0;
         const int failure = posix_spawnp(&process, arguments_[0], &actions, nullptr, arguments_, environ);
@@ -56,7 +57,6 @@ class Contender {
         return times_[times_.size() / 2];
     }
 
-
   private:
     [[noreturn]] void giveUp(const char* why) const {
         std::fprintf(stderr, "compare_commands: %s: %s\n", arguments_[0], why);
@@ -71,7 +71,8 @@ class Contender {
 }  // namespace
 
 int main(int argc, char** argv) {
-    char** separator = std::find_if(argv, argv + argc, [](const char* word) { return std::string_view(word) == "--"; });
+    char** separator =
+        std::find_if(argv, argv + argc, [](const char* word) { return std::string_view(word) == "--"; });
     const auto words = separator - argv;
     if (words < 4 || words + 1 >= argc) {
         std::fprintf(stderr, "usage: compare_commands RUNS LIMIT COMMAND... -- PEER...\n");
@@ -88,6 +89,7 @@ int main(int argc, char** argv) {
         peer.run(i >= 0);
     }
     const double ratio = ours.median() / peer.median();
-    std::printf("%.2f ms against %.2f ms: ratio %.2f (limit %.2f)\n", ours.median(), peer.median(), ratio, limit);
+    std::printf("%.2f ms against %.2f ms: ratio %.2f (limit %.2f)\n", ours.median(), peer.median(), ratio,
+                limit);
     return ratio > limit ? kExitSlower : 0;
 }

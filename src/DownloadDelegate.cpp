@@ -34,7 +34,9 @@ bool listsCDHash(const tm_ticket* ticket, const Data& wanted) {
 DownloadDelegate::DownloadDelegate(std::shared_ptr<PWHashedFile> hashedFile, const Platform& platform)
     : hashedFile_(std::move(hashedFile)), platform_(platform) {}
 
-std::string DownloadDelegate::fileName() const { return hashedFile_->fileURL()->lastPathComponent(); }
+std::string DownloadDelegate::fileName() const {
+    return hashedFile_->fileURL()->lastPathComponent();
+}
 
 std::string DownloadDelegate::prettyHashString() {
     const Data hash = hashedFile_->cdHash().value_or(Data{});
@@ -47,7 +49,8 @@ bool DownloadDelegate::isValidTicketData(const std::optional<Data>& data) {
     if (data->size() > std::numeric_limits<std::uint32_t>::max()) return false;
 
     tm_ticket* decoded = nullptr;
-    if (satchel_get_validated_tm_ticket(data->data(), data->size(), &decoded, platform_.trust) != 0) return false;
+    if (satchel_get_validated_tm_ticket(data->data(), data->size(), &decoded, platform_.trust) != 0)
+        return false;
     const tm_ticket_ptr ticket(decoded);
     if (ticket == nullptr) return false;
 
@@ -62,7 +65,9 @@ bool DownloadDelegate::isValidTicketData(const std::optional<Data>& data) {
     return true;
 }
 
-bool DownloadDelegate::isExistingTicketValid() { return isValidTicketData(hashedFile_->ticketData()); }
+bool DownloadDelegate::isExistingTicketValid() {
+    return isValidTicketData(hashedFile_->ticketData());
+}
 
 void DownloadDelegate::writeDownloadedData(const std::optional<Data>& data, ErrorOut error) {
     if (!data) {
@@ -72,8 +77,7 @@ void DownloadDelegate::writeDownloadedData(const std::optional<Data>& data, Erro
         return;
     }
     NoisyLog("Downloaded ticket has been stored at %@.", tempFileURL_);
-    const auto stored =
-        platform_.files.writeFile(*data, *tempFileURL_, files::FileManager::Writing::atomic);
+    const auto stored = platform_.files.writeFile(*data, *tempFileURL_, files::FileManager::Writing::atomic);
     if (!stored) {
         MessageLog("Could not write ticket to %@ due to %@", tempFileURL_, stored.error());
         hashedFile_->setAppropriateExitCode(kExitCannotCreate);
@@ -102,7 +106,8 @@ void DownloadDelegate::notifyResult() {
         const bool readable = fresh != nullptr && fresh->appropriateExitCode() == kExitOK;
         if (!readable || !isExistingTicketValid()) {
             MessageLog(
-                "Although we wrote the ticket, the written data did not validate. Please restore %@ from backup to "
+                "Although we wrote the ticket, the written data did not validate. Please restore %@ from "
+                "backup to "
                 "try again.",
                 url.path());
             hashedFile_->setAppropriateExitCode(kExitCannotCreate);

@@ -1,8 +1,9 @@
 // The controller of one run: looks the ticket up, judges the server and the ticket, staples it, and reports.
 //
-// Made once by main and kept for the whole run. grabTicket runs on the main thread; the callbacks run on the serial
-// queue of the session they belong to, one at a time, while the main thread waits. Every run that gets as far as the
-// network ends in notifyResult, all but one: a large download that fails leaves the process waiting.
+// Made once by main and kept for the whole run. grabTicket runs on the main thread; the callbacks run on the
+// serial queue of the session they belong to, one at a time, while the main thread waits. Every run that gets
+// as far as the network ends in notifyResult, all but one: a large download that fails leaves the process
+// waiting.
 #pragma once
 
 #include <cstdint>
@@ -49,12 +50,13 @@ class DownloadDelegate : public https::SessionDelegate {
 
     // Lookup.
 
-    /// True when asynchronous work has started that will end the process; false when the caller ends it with the
-    /// hashed file's exit code, or 1 when that is 0.
+    /// True when asynchronous work has started that will end the process; false when the caller ends it with
+    /// the hashed file's exit code, or 1 when that is 0.
     bool grabTicket();
 
     /// The lookup's completion handler.
-    void lookupDidComplete(const std::optional<Data>& data, const std::optional<https::HTTPResponse>& response,
+    void lookupDidComplete(const std::optional<Data>& data,
+                           const std::optional<https::HTTPResponse>& response,
                            const std::optional<Error>& error);
 
     // Large tickets.
@@ -72,7 +74,8 @@ class DownloadDelegate : public https::SessionDelegate {
 
     // Acceptance and report.
 
-    /// Whether the ticket is genuine, not revoked, and lists the file's cdhash. Records the exit code, prints nothing.
+    /// Whether the ticket is genuine, not revoked, and lists the file's cdhash. Records the exit code, prints
+    /// nothing.
     bool isValidTicketData(const std::optional<Data>& data);
     bool isExistingTicketValid();
 

@@ -12,7 +12,8 @@ constexpr std::string_view kAssetFileName = "lmasset.ticket";
 constexpr int kHTTPStatusOK = 200;
 
 std::string replacingAll(std::string text, std::string_view token, std::string_view replacement) {
-    for (std::size_t at = text.find(token); at != std::string::npos; at = text.find(token, at + replacement.size()))
+    for (std::size_t at = text.find(token); at != std::string::npos;
+         at = text.find(token, at + replacement.size()))
         text.replace(at, token.size(), replacement);
     return text;
 }
@@ -36,7 +37,8 @@ void DownloadDelegate::didFinishDownloading(https::Session&, https::Task& task, 
     const std::size_t length = data ? data->size() : 0;
     const auto response = task.response();
     if (length != largeTicketSize_.unsignedIntegerValue()) {
-        MessageLog("We were expecting a ticket size of %@ but download a ticket of size %lu", largeTicketSize_, length);
+        MessageLog("We were expecting a ticket size of %@ but download a ticket of size %lu",
+                   largeTicketSize_, length);
         hashedFile_->setAppropriateExitCode(kExitDataError);
     } else if (response && response->status != kHTTPStatusOK) {
         MessageLog("Attempting to download larger ticket for %@ failed. %@", fileName(),

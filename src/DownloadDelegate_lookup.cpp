@@ -32,7 +32,8 @@ constexpr int kRecordNameVersionWithAlgorithm = 2;
 URL lookupURLForHost(const std::string& host, std::string_view container, std::string_view environment) {
     // The host was checked when it was read, so this is a URL whatever the container holds.
     return URL::fromString("https://" + host)
-        ->appendingPathComponent(foundation::format("database/1/%@/%@/public/records/lookup", container, environment));
+        ->appendingPathComponent(
+            foundation::format("database/1/%@/%@/public/records/lookup", container, environment));
 }
 
 // Text of a member that must be text when it is there at all.
@@ -54,7 +55,8 @@ std::optional<URL> DownloadDelegate::lookupURL(std::optional<Error>& error) cons
         return lookupURLForHost(*host, kDefaultContainer, kProduction);
 
     const auto defaults = platform_.userDefaults.openDomain(kDefaultsDomain);
-    defaults->registerDefaults({{std::string(kContainerKey), kDefaultContainer}, {std::string(kProductionKey), true}});
+    defaults->registerDefaults(
+        {{std::string(kContainerKey), kDefaultContainer}, {std::string(kProductionKey), true}});
     return lookupURLForHost(*host, defaults->stringForKey(kContainerKey),
                             defaults->boolForKey(kProductionKey) ? kProduction : kDevelopment);
 }
@@ -168,7 +170,8 @@ std::optional<Data> DownloadDelegate::ticketFromResponse(const Value& response, 
         downloading = asynchronouslyDownloadLargeTicketFromURLString(*url);
         return std::nullopt;
     }
-    MessageLog("Lumora query for %@ (%@) failed due to \"%@\".", fileName(), prettyHashString(), record["reason"]);
+    MessageLog("Lumora query for %@ (%@) failed due to \"%@\".", fileName(), prettyHashString(),
+               record["reason"]);
     return std::nullopt;
 }
 

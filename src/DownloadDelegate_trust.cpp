@@ -1,4 +1,5 @@
-// Which servers may answer: one that satisfies either of the two server policies for the host being contacted.
+// Which servers may answer: one that satisfies either of the two server policies for the host being
+// contacted.
 
 #include <vector>
 
@@ -15,7 +16,8 @@ bool isSuccess(trust::Verdict verdict) {
 void reportRefusal(const trust::Trust& serverTrust, trust::Verdict verdict) {
     const foundation::Array properties = serverTrust.copyProperties();
     MessageLog("Certificate trust evaluation did not return expected result. (%d) %@",
-               static_cast<std::uint32_t>(verdict), serverTrust.copyFailureDescription().value_or(std::string()));
+               static_cast<std::uint32_t>(verdict),
+               serverTrust.copyFailureDescription().value_or(std::string()));
     for (const foundation::Value& certificate : properties) {
         const foundation::Value& error = certificate[trust::kPropertyError];
         if (error.isNil()) continue;

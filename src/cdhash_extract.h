@@ -14,8 +14,9 @@ inline constexpr std::string_view kSecureTimestampKey = "secureTimestamp";  // t
 inline constexpr std::string_view kSigningIdKey = "signingId";              // text
 inline constexpr std::string_view kFlagsKey = "flags";                      // number
 
-/// The properties of the code at `fileURL`; empty on any failure. An invalid or missing signature is silent; what
-/// the code-signing service itself fails at goes to the system log. Never prints, never changes an exit code.
+/// The properties of the code at `fileURL`; empty on any failure. An invalid or missing signature is silent;
+/// what the code-signing service itself fails at goes to the system log. Never prints, never changes an exit
+/// code.
 foundation::Dictionary basicCodeProperties(const foundation::URL& fileURL, const Platform& platform);
 
 }  // namespace pinwell

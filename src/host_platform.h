@@ -8,7 +8,8 @@
 
 namespace pinwell {
 
-/// Owns every service; must outlive whatever was given its services(). Making it reads nothing but the environment.
+/// Owns every service; must outlive whatever was given its services(). Making it reads nothing but the
+/// environment.
 class HostPlatform {
   public:
     /// `exitProcess` ends the process with a status.

@@ -52,10 +52,17 @@ void scanOptions(int argc, char** argv) {
     opterr = 0;  // the usage text says it all
     for (int found = 0; (found = getopt_long(argc, argv, "qv", options, nullptr)) != -1;) {
         switch (found) {
-            case 'q': verboseLevel = kVerbosityQuiet; break;
-            case 'v': verboseLevel = kVerbosityVerbose; break;
-            case '?': printUsage(); break;
-            default: break;
+            case 'q':
+                verboseLevel = kVerbosityQuiet;
+                break;
+            case 'v':
+                verboseLevel = kVerbosityVerbose;
+                break;
+            case '?':
+                printUsage();
+                break;
+            default:
+                break;
         }
     }
 }

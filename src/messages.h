@@ -1,7 +1,7 @@
 // The two message functions, and the setting that gates them.
 //
-// Each call is one line on standard output, in one write, without a prefix. A format that ends in a newline gives an
-// empty line after it. A standard output that is closed or full loses the line and nothing else.
+// Each call is one line on standard output, in one write, without a prefix. A format that ends in a newline
+// gives an empty line after it. A standard output that is closed or full loses the line and nothing else.
 #pragma once
 
 #include <cstdint>

@@ -97,9 +97,7 @@ class LocalFileManager final : public FileManager {
         return onPath(file, [](const std::string& path) { return openFileHandle(path, O_RDWR); });
     }
 
-    URL temporaryDirectory() override {
-        return foundation::temporaryDirectory();
-    }
+    URL temporaryDirectory() override { return foundation::temporaryDirectory(); }
 
   private:
     TypeNaming typeNaming_;

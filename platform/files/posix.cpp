@@ -54,8 +54,8 @@ Result<OpenFile> openRegularFile(const std::string& path, int access) {
 }
 
 Result<OpenFile> createFile(const std::string& path, mode_t mode) {
-    FileDescriptor descriptor(uninterrupted(
-        [&] { return open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | kSafeFlags, mode); }));
+    FileDescriptor descriptor(
+        uninterrupted([&] { return open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | kSafeFlags, mode); }));
     if (!descriptor) return lastError(path);
     HalfMadeFile halfMade(path);
     auto file = regularFile(std::move(descriptor), path);

@@ -4,7 +4,8 @@
 
 namespace pinwell::foundation {
 
-LazyLibrary::LazyLibrary(const char* name) : handle_(dlopen(name, RTLD_LAZY)), complete_(handle_ != nullptr) {}
+LazyLibrary::LazyLibrary(const char* name)
+    : handle_(dlopen(name, RTLD_LAZY)), complete_(handle_ != nullptr) {}
 
 void* LazyLibrary::address(const char* name) {
     void* const found = handle_ == nullptr ? nullptr : dlsym(handle_, name);

@@ -1,13 +1,14 @@
 // Shared libraries that only some runs need, opened when one does.
 //
-// A library that is linked costs every start of the program: it is mapped and relocated with all that it depends on in
-// turn. One that a run rarely reaches is opened here instead, and its functions are found by name.
+// A library that is linked costs every start of the program: it is mapped and relocated with all that it
+// depends on in turn. One that a run rarely reaches is opened here instead, and its functions are found by
+// name.
 #pragma once
-
 
 namespace pinwell::foundation {
 
-/// Opened when it is made, never closed: what a library leaves behind (threads, exit handlers) needs it there.
+/// Opened when it is made, never closed: what a library leaves behind (threads, exit handlers) needs it
+/// there.
 class LazyLibrary {
   public:
     explicit LazyLibrary(const char* name);

@@ -11,8 +11,9 @@ namespace pinwell::foundation {
 /// The last component of the name the process was started under.
 std::string processName();
 
-/// Lets closed standard streams lead to /dev/null. What is opened next takes the lowest free number: a connection or a file
-/// would stand in a closed stream's place and get the messages. To be called before anything is opened.
+/// Lets closed standard streams lead to /dev/null. What is opened next takes the lowest free number: a
+/// connection or a file would stand in a closed stream's place and get the messages. To be called before
+/// anything is opened.
 void occupyStandardStreams();
 
 /// A fresh UUID-like string (RFC 9562, version 4), upper case, from the kernel's random source.

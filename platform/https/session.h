@@ -1,12 +1,12 @@
 // HTTPS sessions: data and download tasks whose server trust the delegate decides.
 //
-// A session is ephemeral: nothing of it outlives the process, no cookies, cache or credentials are kept. It owns a
-// serial callback queue; the delegate's methods and the completion handlers run there, one at a time, never on the
-// thread that started the task. The tasks of a session are carried out one after another. The process may be
-// ended by exit() in any callback.
+// A session is ephemeral: nothing of it outlives the process, no cookies, cache or credentials are kept. It
+// owns a serial callback queue; the delegate's methods and the completion handlers run there, one at a time,
+// never on the thread that started the task. The tasks of a session are carried out one after another. The
+// process may be ended by exit() in any callback.
 //
-// Destroying a session ends its running tasks with `cancelled`; it returns when their callbacks have. A session
-// must not be destroyed from its own queue.
+// Destroying a session ends its running tasks with `cancelled`; it returns when their callbacks have. A
+// session must not be destroyed from its own queue.
 #pragma once
 
 #include <functional>
@@ -33,8 +33,8 @@ inline constexpr std::string_view kUserAgent = "pinwell/34.0";
 
 /// Codes of kURLErrorDomain.
 enum class URLErrorCode : std::int64_t {
-    cancelled = 1,        // the challenge was cancelled: the server is not trusted
-    unsupportedURL = 2,   // no URL, not https, or a redirect to what is not
+    cancelled = 1,       // the challenge was cancelled: the server is not trusted
+    unsupportedURL = 2,  // no URL, not https, or a redirect to what is not
     cannotFindHost = 3,
     cannotConnect = 4,
     timedOut = 5,
@@ -107,13 +107,13 @@ class SessionDelegate {
   public:
     virtual ~SessionDelegate() = default;
 
-    /// Must call `completion` exactly once, before it returns. Default handling of a server-trust challenge, or a
-    /// credential for another trust object, refuses the server.
+    /// Must call `completion` exactly once, before it returns. Default handling of a server-trust challenge,
+    /// or a credential for another trust object, refuses the server.
     virtual void didReceiveChallenge(Session& session, const AuthenticationChallenge& challenge,
                                      const ChallengeCompletion& completion) = 0;
 
-    /// The body of a download task is in the file at `location` (mode 0600, in the temporary directory), which is
-    /// removed when this returns.
+    /// The body of a download task is in the file at `location` (mode 0600, in the temporary directory),
+    /// which is removed when this returns.
     virtual void didFinishDownloading(Session& session, Task& task, const URL& location) = 0;
 
     /// A download task has ended; without an error, didFinishDownloading has run before.
@@ -140,8 +140,8 @@ class Task {
 };
 
 /// Body and response of a data task, or its error; an empty body is there, and empty.
-using DataCompletion =
-    std::function<void(const std::optional<Data>&, const std::optional<HTTPResponse>&, const std::optional<Error>&)>;
+using DataCompletion = std::function<void(const std::optional<Data>&, const std::optional<HTTPResponse>&,
+                                          const std::optional<Error>&)>;
 
 class Session {
   public:

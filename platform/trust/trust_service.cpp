@@ -148,8 +148,9 @@ class ChainTrust final : public Trust {
     std::optional<std::string> policyError_;
 };
 
-/// The certificates parsed last. A run meets the same few again and again (the ticket that is stapled and the one that
-/// is downloaded, both policies of a server), and parsing one costs more than verifying its signature.
+/// The certificates parsed last. A run meets the same few again and again (the ticket that is stapled and the
+/// one that is downloaded, both policies of a server), and parsing one costs more than verifying its
+/// signature.
 class RecentCertificates {
   public:
     X509CertificateRef parse(ByteView der) {

@@ -53,7 +53,9 @@ struct FreeParser {
     void operator()(GMarkupParseContext* context) const { gio().parserFree(context); }
 };
 
-bool isLetterOrDigit(char c) { return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z'); }
+bool isLetterOrDigit(char c) {
+    return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z');
+}
 
 // "text/plain": two parts that can stand in a path.
 bool isWellFormed(std::string_view type) {
@@ -92,8 +94,8 @@ std::string untranslatedComment(foundation::ByteView document) {
     CommentReader reader;
     const std::unique_ptr<GMarkupParseContext, FreeParser> context(
         gio().parserNew(&parser, GMarkupParseFlags{}, &reader, nullptr));
-    const bool parsed = gio().parserParse(context.get(), text.data(),
-                                                     static_cast<gssize>(text.size()), nullptr) != FALSE;
+    const bool parsed =
+        gio().parserParse(context.get(), text.data(), static_cast<gssize>(text.size()), nullptr) != FALSE;
     return parsed ? reader.comment : std::string();
 }
 

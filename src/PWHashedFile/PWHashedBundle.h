@@ -1,7 +1,8 @@
 // Code-signed bundles, and plain executables that are handed over as such.
 //
 // The ticket is a file of its own, Contents/CodeResources below the bundle's root; the cdhash is that of the
-// bundle's code signature. The ticket is written straight into the bundle, without the clone and swap of the base.
+// bundle's code signature. The ticket is written straight into the bundle, without the clone and swap of the
+// base.
 #pragma once
 
 #include "src/PWHashedFile/PWHashedFile.h"

@@ -22,9 +22,12 @@ std::shared_ptr<PWHashedFile> PWHashedFile::initWithFileURL(const URL& fileURL, 
     NoisyLog("Properties are %@", properties->dictionary());
 
     switch (assessmentClassForUTI(platform.types, properties->typeIdentifier, fileURL.pathExtension())) {
-        case AssessmentClass::bundle: return std::make_shared<PWHashedBundle>(fileURL, platform);
-        case AssessmentClass::diskImage: return std::make_shared<PWHashedDiskImage>(fileURL, platform);
-        case AssessmentClass::package: break;
+        case AssessmentClass::bundle:
+            return std::make_shared<PWHashedBundle>(fileURL, platform);
+        case AssessmentClass::diskImage:
+            return std::make_shared<PWHashedDiskImage>(fileURL, platform);
+        case AssessmentClass::package:
+            break;
         case AssessmentClass::unknown:
             if (properties->isDirectory && platform.files.mainExecutableOfBundle(fileURL))
                 return std::make_shared<PWHashedBundle>(fileURL, platform);
@@ -34,7 +37,8 @@ std::shared_ptr<PWHashedFile> PWHashedFile::initWithFileURL(const URL& fileURL, 
     return nullptr;
 }
 
-std::optional<Data> PWHashedFile::cached(std::optional<Data>& cache, std::optional<Data> (PWHashedFile::*hook)()) {
+std::optional<Data> PWHashedFile::cached(std::optional<Data>& cache,
+                                         std::optional<Data> (PWHashedFile::*hook)()) {
     {
         const std::lock_guard lock(mutex_);
         if (!cache) cache = (this->*hook)().value_or(Data{});
@@ -43,11 +47,16 @@ std::optional<Data> PWHashedFile::cached(std::optional<Data>& cache, std::option
     return cache->empty() ? std::nullopt : cache;
 }
 
-std::optional<Data> PWHashedFile::ticketData() { return cached(internalTicketData_, &PWHashedFile::_ticketData); }
-std::optional<Data> PWHashedFile::cdHash() { return cached(internalCDHash_, &PWHashedFile::_cdHash); }
+std::optional<Data> PWHashedFile::ticketData() {
+    return cached(internalTicketData_, &PWHashedFile::_ticketData);
+}
+std::optional<Data> PWHashedFile::cdHash() {
+    return cached(internalCDHash_, &PWHashedFile::_cdHash);
+}
 
 bool PWHashedFile::writeNewTicketDataFromURL(const URL& source, ErrorOut error) {
-    NoisyLog("Attempting to attach a new ticket to %@. Let's see how that works out.", fileURL_->lastPathComponent());
+    NoisyLog("Attempting to attach a new ticket to %@. Let's see how that works out.",
+             fileURL_->lastPathComponent());
     return common_writeNewTicketDataFromURL(source, false, error);
 }
 
@@ -80,7 +89,8 @@ bool PWHashedFile::common_writeNewTicketDataFromURL(const std::optional<URL>& so
     const std::optional<URL> copy = canClone ? makeWorkingCopy() : std::nullopt;
 
     std::optional<Error> writeError;  // not handed out: this driver reports the swap's error only
-    if (!_writeNewTicketDataFromURL(source, copy.value_or(*fileURL_), deleteExisting, &writeError)) return false;
+    if (!_writeNewTicketDataFromURL(source, copy.value_or(*fileURL_), deleteExisting, &writeError))
+        return false;
     if (!copy) return true;
 
     std::optional<Error> reported;
@@ -97,11 +107,16 @@ bool PWHashedFile::common_writeNewTicketDataFromURL(const std::optional<URL>& so
 }
 
 void PWHashedFile::mustOverride(std::string_view operation) const {
-    throw InternalInconsistency(foundation::format("You must override %@ in the %@ subclass", operation, className()));
+    throw InternalInconsistency(
+        foundation::format("You must override %@ in the %@ subclass", operation, className()));
 }
 
-std::optional<Data> PWHashedFile::_ticketData() { mustOverride("_ticketData"); }
-std::optional<Data> PWHashedFile::_cdHash() { mustOverride("_cdHash"); }
+std::optional<Data> PWHashedFile::_ticketData() {
+    mustOverride("_ticketData");
+}
+std::optional<Data> PWHashedFile::_cdHash() {
+    mustOverride("_cdHash");
+}
 bool PWHashedFile::_writeNewTicketDataFromURL(const std::optional<URL>&, const URL&, bool, ErrorOut) {
     mustOverride("_writeNewTicketDataFromURL:intoURL:deleteExisting:error:");
 }

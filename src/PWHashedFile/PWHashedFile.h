@@ -1,5 +1,5 @@
-// One artefact of the command line: where it is, the cdhash that identifies it, the ticket stapled to it, and the
-// exit code that the run has reached so far.
+// One artefact of the command line: where it is, the cdhash that identifies it, the ticket stapled to it, and
+// the exit code that the run has reached so far.
 #pragma once
 
 #include <cstdint>
@@ -43,8 +43,8 @@ class InternalInconsistency : public std::logic_error {
 /// The two lazy accessors may be called from any thread; everything else belongs to the run's single flow.
 class PWHashedFile {
   public:
-    /// A hashed file of the right kind; the base object with exit code 66 when the file cannot be read; null when
-    /// its kind is unsupported. `platform`'s services must outlive the object.
+    /// A hashed file of the right kind; the base object with exit code 66 when the file cannot be read; null
+    /// when its kind is unsupported. `platform`'s services must outlive the object.
     static std::shared_ptr<PWHashedFile> initWithFileURL(const URL& fileURL, const Platform& platform);
 
     PWHashedFile(std::optional<URL> fileURL, const Platform& platform);
@@ -76,10 +76,11 @@ class PWHashedFile {
     /// Removes the stapled ticket.
     virtual bool _deleteExistingTicket(ErrorOut error);
 
-    /// The safe-replacement driver under both: works on a clone beside the file and swaps it into place where the
-    /// volume can clone, else in place. A failed swap still answers true, with the error handed out: callers that
-    /// need to know must look at it.
-    bool common_writeNewTicketDataFromURL(const std::optional<URL>& source, bool deleteExisting, ErrorOut error);
+    /// The safe-replacement driver under both: works on a clone beside the file and swaps it into place where
+    /// the volume can clone, else in place. A failed swap still answers true, with the error handed out:
+    /// callers that need to know must look at it.
+    bool common_writeNewTicketDataFromURL(const std::optional<URL>& source, bool deleteExisting,
+                                          ErrorOut error);
 
     // Hooks.
 
@@ -89,10 +90,10 @@ class PWHashedFile {
     /// Computes the cdhash; sets digestAlgorithm on the way.
     virtual std::optional<Data> _cdHash();
 
-    /// Writes the ticket found at `source` into `target`, or removes the one that is there. Sets the exit code: 0,
-    /// or 73 on failure, which also answers false and hands out the error.
-    virtual bool _writeNewTicketDataFromURL(const std::optional<URL>& source, const URL& target, bool deleteExisting,
-                                            ErrorOut error);
+    /// Writes the ticket found at `source` into `target`, or removes the one that is there. Sets the exit
+    /// code: 0, or 73 on failure, which also answers false and hands out the error.
+    virtual bool _writeNewTicketDataFromURL(const std::optional<URL>& source, const URL& target,
+                                            bool deleteExisting, ErrorOut error);
 
   protected:
     virtual std::string_view className() const { return "PWHashedFile"; }

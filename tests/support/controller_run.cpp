@@ -39,7 +39,8 @@ std::optional<int> ControllerRun::fail(const foundation::Error& error) {
 }
 
 std::string ControllerRun::inlineAnswer(const foundation::Data& ticket) {
-    return R"({"records":[{"fields":{"signedTicket":{"value":")" + foundation::encodeBase64(ticket) + R"("}}}]})";
+    return R"({"records":[{"fields":{"signedTicket":{"value":")" + foundation::encodeBase64(ticket) +
+           R"("}}}]})";
 }
 
 }  // namespace pinwell::test

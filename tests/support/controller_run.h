@@ -26,7 +26,8 @@ class ControllerRun {
     const https::Request& request() const;
 
     /// Answers the lookup; what the process ends with.
-    std::optional<int> answer(std::string_view body, https::Headers headers = {{"X-Ostrel-Request-UUID", "REQUEST"}},
+    std::optional<int> answer(std::string_view body,
+                              https::Headers headers = {{"X-Ostrel-Request-UUID", "REQUEST"}},
                               int status = 200);
     std::optional<int> fail(const foundation::Error& error);
 

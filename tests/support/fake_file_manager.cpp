@@ -119,7 +119,9 @@ class RecordingFileManager::Handle final : public FileHandle {
     std::uint64_t seekToEnd() override { return note("seekToEnd"), real_->seekToEnd(); }
     std::uint64_t seek(std::uint64_t position) override { return note("seek"), real_->seek(position); }
     std::uint64_t position() override { return note("position"), real_->position(); }
-    Data read(std::uint64_t length) override { return note("read"), real_->read(record_->readableOf(length)); }
+    Data read(std::uint64_t length) override {
+        return note("read"), real_->read(record_->readableOf(length));
+    }
     void write(ByteView bytes) override { note("write"), real_->write(bytes); }
     void truncate(std::uint64_t length) override { note("truncate"), real_->truncate(length); }
     void synchronize() override { note("synchronize"), real_->synchronize(); }

@@ -18,7 +18,9 @@ class TemporaryDirectory {
 
     const std::string& path() const noexcept { return path_; }
     std::string operator/(std::string_view name) const { return path_ + "/" + std::string(name); }
-    foundation::URL url(std::string_view name) const { return foundation::URL::fileURLWithPath(*this / name); }
+    foundation::URL url(std::string_view name) const {
+        return foundation::URL::fileURLWithPath(*this / name);
+    }
 
   private:
     std::string path_;

@@ -20,9 +20,9 @@ Platform TestPlatform::services() {
 }
 
 Platform TestPlatform::servicesWith(codesign::CodeSigningService& other) {
-    return {files, *types,       other,     trust,
-            https, userDefaults, systemLog,   platformDirectory,
-            [](int status) { throw ProcessExit{status}; }};
+    return {files, *types, other, trust, https, userDefaults, systemLog, platformDirectory, [](int status) {
+                throw ProcessExit{status};
+            }};
 }
 
 Data unsignedTicket(const std::vector<Data>& hashes, std::uint32_t flags) {
@@ -37,7 +37,8 @@ Data unsignedTicket(const std::vector<Data>& hashes, std::uint32_t flags) {
 
     ByteWriter container;
     container.text("s8ch").le16(1).le16(0);
-    container.le32(static_cast<std::uint32_t>(certificates.size())).le32(static_cast<std::uint32_t>(payload.size()));
+    container.le32(static_cast<std::uint32_t>(certificates.size()))
+        .le32(static_cast<std::uint32_t>(payload.size()));
     container.bytes(certificates.data()).bytes(payload.data()).zeros(72);
     return std::move(container).take();
 }

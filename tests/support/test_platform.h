@@ -1,7 +1,8 @@
 // A whole platform of fakes around a real directory: what a unit test of the tool runs on.
 //
-// Code signing, trust, sessions, user defaults and the system log answer what the test says; files and types are
-// real, below a temporary directory, with every file operation recorded. The end of the process is an exception.
+// Code signing, trust, sessions, user defaults and the system log answer what the test says; files and types
+// are real, below a temporary directory, with every file operation recorded. The end of the process is an
+// exception.
 #pragma once
 
 #include <optional>
@@ -55,8 +56,9 @@ class TestPlatform {
     foundation::PlatformDirectory platformDirectory;
 };
 
-/// A ticket container that is well framed and whose payload lists `hashes` with algorithm 2, each of the payload's
-/// one hash length. Its certificates and signature are filler: only a trust service that accepts anything takes it.
+/// A ticket container that is well framed and whose payload lists `hashes` with algorithm 2, each of the
+/// payload's one hash length. Its certificates and signature are filler: only a trust service that accepts
+/// anything takes it.
 foundation::Data unsignedTicket(const std::vector<foundation::Data>& hashes, std::uint32_t flags = 0);
 
 }  // namespace pinwell::test

@@ -219,7 +219,8 @@ TEST_F(FailingCalls, InAPlainWriteLeaveAWholeNewFileOrNone) {
                 EXPECT_EQ(readFile(path("file")), "new") << failed;
             }
         });
-    EXPECT_THAT((std::set<std::string>{"open", "fstat", "fchmod", "write", "fsync", "close"}), IsSubsetOf(calls));
+    EXPECT_THAT((std::set<std::string>{"open", "fstat", "fchmod", "write", "fsync", "close"}),
+                IsSubsetOf(calls));
 }
 
 TEST_F(FailingCalls, InAnOverwriteComeOut) {

@@ -34,7 +34,9 @@ class Bundle : public testing::Test {
     PWHashedBundle bundle{platform.directory.url("App.app"), platform.services()};
 };
 
-TEST_F(Bundle, KeepsItsTicketInContentsCodeResources) { EXPECT_EQ(bundle.codeResourcesURL(), ticketURL()); }
+TEST_F(Bundle, KeepsItsTicketInContentsCodeResources) {
+    EXPECT_EQ(bundle.codeResourcesURL(), ticketURL());
+}
 
 TEST_F(Bundle, TakesHashAndAlgorithmFromItsCodeSignature) {
     const MessageCapture output(kVerbosityVerbose);
@@ -181,7 +183,9 @@ TEST_F(Bundle, DeletingATicketThatCannotBeTrashedFailsAndKeepsIt) {
     platform.files.fail("trashItem", EPERM);
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_FALSE(bundle._deleteExistingTicket());
-    EXPECT_EQ(output.text().find("Could not delete ticket " + ticketURL().absoluteString() + ". Error Domain="), 0U);
+    EXPECT_EQ(
+        output.text().find("Could not delete ticket " + ticketURL().absoluteString() + ". Error Domain="),
+        0U);
     EXPECT_EQ(test::readFile(ticketPath()), "OLD");
 }
 

@@ -53,15 +53,11 @@ TEST_F(Factory, VerboseRunShowsAllSixProperties) {
     std::filesystem::create_directory(platform.directory / "A.app");
     const MessageCapture output(kVerbosityVerbose);
     make("A.app");
-    EXPECT_EQ(output.lines(), (std::vector<std::string>{"Processing: " + (platform.directory / "A.app"),
-                                                        "Properties are {",
-                                                        "    isApplication = 1;",
-                                                        "    isDirectory = 1;",
-                                                        "    isPackage = 1;",
-                                                        "    isSymbolicLink = 0;",
-                                                        "    localizedTypeDescription = application;",
-                                                        "    typeIdentifier = com.ostrel.application-bundle;",
-                                                        "}"}));
+    EXPECT_EQ(output.lines(), (std::vector<std::string>{
+                                  "Processing: " + (platform.directory / "A.app"), "Properties are {",
+                                  "    isApplication = 1;", "    isDirectory = 1;", "    isPackage = 1;",
+                                  "    isSymbolicLink = 0;", "    localizedTypeDescription = application;",
+                                  "    typeIdentifier = com.ostrel.application-bundle;", "}"}));
 }
 
 TEST_F(Factory, APlainExecutableIsABundle) {
@@ -170,7 +166,8 @@ TEST_F(Caches, AnswerNothingForAnEmptyTicket) {
 
 TEST_F(Caches, RunTheHookOnceForManyThreads) {
     std::vector<std::thread> threads;
-    for (int i = 0; i < 8; ++i) threads.emplace_back([&] { EXPECT_EQ(file.cdHash(), Data(20, std::byte{1})); });
+    for (int i = 0; i < 8; ++i)
+        threads.emplace_back([&] { EXPECT_EQ(file.cdHash(), Data(20, std::byte{1})); });
     for (auto& thread : threads) thread.join();
     EXPECT_EQ(file.hashCalls, 1);
 }
@@ -196,12 +193,14 @@ TEST_F(Caches, OfThePlainBaseRaiseAndNameOperationAndClass) {
         return "nothing was raised";
     };
     EXPECT_EQ(reasonOf([&] { base._cdHash(); }), "You must override _cdHash in the PWHashedFile subclass");
-    EXPECT_EQ(reasonOf([&] { base._ticketData(); }), "You must override _ticketData in the PWHashedFile subclass");
-    EXPECT_EQ(reasonOf([&] {
-                  base._writeNewTicketDataFromURL(std::nullopt, platform.directory.url("x"), true, nullptr);
-              }),
-              "You must override _writeNewTicketDataFromURL:intoURL:deleteExisting:error: in the PWHashedFile "
-              "subclass");
+    EXPECT_EQ(reasonOf([&] { base._ticketData(); }),
+              "You must override _ticketData in the PWHashedFile subclass");
+    EXPECT_EQ(
+        reasonOf([&] {
+            base._writeNewTicketDataFromURL(std::nullopt, platform.directory.url("x"), true, nullptr);
+        }),
+        "You must override _writeNewTicketDataFromURL:intoURL:deleteExisting:error: in the PWHashedFile "
+        "subclass");
 }
 
 class SafeReplacement : public testing::Test {
@@ -259,7 +258,8 @@ TEST_F(SafeReplacement, WithoutAReplacementDirectoryWritesInPlace) {
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_TRUE(staple());
     EXPECT_TRUE(wroteInPlace());
-    EXPECT_EQ(output.lines()[1].find("Could not create replacement directory for " + path + ". Error Domain="), 0U);
+    EXPECT_EQ(
+        output.lines()[1].find("Could not create replacement directory for " + path + ". Error Domain="), 0U);
     EXPECT_EQ(platform.files.count("replaceItem"), 0U);
 }
 

@@ -26,7 +26,9 @@ class Acceptance : public testing::Test {
         controller->setTempFileURL(platform.directory.url("tmp/REQUEST.ticket"));
     }
 
-    static Data hash(unsigned value, std::size_t size = 20) { return Data(size, static_cast<std::byte>(value)); }
+    static Data hash(unsigned value, std::size_t size = 20) {
+        return Data(size, static_cast<std::byte>(value));
+    }
 
     void setFileHash(const Data& value) {
         platform.codeSigning.information.emplace();
@@ -222,9 +224,8 @@ TEST_F(Report, AGoodStapleIsReadBackAndReported) {
     const MessageCapture output(kVerbosityNormal);
     EXPECT_EQ(report(), 0);
     EXPECT_NE(controller->hashedFile(), file);
-    EXPECT_EQ(output.lines(),
-              (std::vector<std::string>{"Processing: " + (platform.directory / "App.app"),
-                                        "The staple and validate action worked!"}));
+    EXPECT_EQ(output.lines(), (std::vector<std::string>{"Processing: " + (platform.directory / "App.app"),
+                                                        "The staple and validate action worked!"}));
 }
 
 TEST_F(Report, ASwallowedWriteFailureIsFoundWhenReadingBack) {

@@ -72,8 +72,9 @@ TEST_F(LargeTicket, ThePlainRequestIsAGETWithoutBodyOrHeaders) {
 TEST_F(LargeTicket, ATemplateThatMakesNoURLIsNotStartedAndSaysSoWithTheMissingURL) {
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_FALSE(start("no url ${f}"));
-    EXPECT_EQ(output.lines(), (std::vector<std::string>{"Large ticket was requested from an invalid URL: (null)",
-                                                        "URL of large ticket asset: no url lmasset.ticket"}));
+    EXPECT_EQ(output.lines(),
+              (std::vector<std::string>{"Large ticket was requested from an invalid URL: (null)",
+                                        "URL of large ticket asset: no url lmasset.ticket"}));
 }
 
 TEST_F(LargeTicket, ATicketOfTheAnnouncedSizeIsJudgedAndKept) {
@@ -81,7 +82,8 @@ TEST_F(LargeTicket, ATicketOfTheAnnouncedSizeIsJudgedAndKept) {
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_EQ(finish(ticket), 0);
     EXPECT_NE(output.text().find("Big ticket response is "), std::string::npos);
-    EXPECT_TRUE(output.contains("Downloaded large ticket size is " + std::to_string(ticket.size()) + " bytes"));
+    EXPECT_TRUE(
+        output.contains("Downloaded large ticket size is " + std::to_string(ticket.size()) + " bytes"));
     EXPECT_EQ(test::readFile(run.platform.directory / "tmp/REQUEST.ticket"), foundation::toString(ticket));
 }
 
@@ -105,8 +107,8 @@ TEST_F(LargeTicket, AnotherStatusThan200EndsWith68) {
     run.controller.setLargeTicketSize(ticket.size());
     const MessageCapture output(kVerbosityNormal);
     EXPECT_EQ(finish(ticket, 500), 68);
-    EXPECT_EQ(output.lines()[0],
-              "Attempting to download larger ticket for App.app failed. " + https::localizedStringForStatusCode(500));
+    EXPECT_EQ(output.lines()[0], "Attempting to download larger ticket for App.app failed. " +
+                                     https::localizedStringForStatusCode(500));
 }
 
 TEST_F(LargeTicket, WithoutAnAnnouncedSizeEveryDownloadFailsTheSizeCheck) {

@@ -48,14 +48,16 @@ TEST_F(Lookup, AsksThePlatformsHostForTheDefaultContainerInProduction) {
     test::writeFile(run.platform.directory / "platform/platform.json",
                     std::string_view(R"({"lumora":{"host":"localhost:8443"}})"));
     ASSERT_TRUE(grab());
-    EXPECT_EQ(url(),
-              "https://localhost:8443/database/1/com.ostrel.tm.ticket-delivery/production/public/records/lookup");
+    EXPECT_EQ(
+        url(),
+        "https://localhost:8443/database/1/com.ostrel.tm.ticket-delivery/production/public/records/lookup");
 }
 
 TEST_F(Lookup, AsksTheBuiltInHostWhenThePlatformNamesNone) {
     ASSERT_TRUE(grab());
-    EXPECT_EQ(url(), "https://api.lumora.example/database/1/com.ostrel.tm.ticket-delivery/production/public/"
-                     "records/lookup");
+    EXPECT_EQ(url(),
+              "https://api.lumora.example/database/1/com.ostrel.tm.ticket-delivery/production/public/"
+              "records/lookup");
 }
 
 TEST_F(Lookup, ListensToUserDefaultsOnAnInternalBuildOnly) {
@@ -70,7 +72,8 @@ TEST_F(Lookup, TakesContainerAndEnvironmentFromUserDefaultsOnAnInternalBuild) {
     run.platform.userDefaults.domains["com.ostrel.tm.pinwell"] = {{"lm-container", "com.example.other"},
                                                                   {"lm-production", false}};
     ASSERT_TRUE(grab());
-    EXPECT_NE(url().find("/database/1/com.example.other/development/public/records/lookup"), std::string::npos);
+    EXPECT_NE(url().find("/database/1/com.example.other/development/public/records/lookup"),
+              std::string::npos);
 }
 
 TEST_F(Lookup, FallsBackToTheRegisteredDefaultsValueByValue) {
@@ -110,7 +113,8 @@ TEST_F(Lookup, VerboseRunShowsTheBodyObjectAndTheHeaders) {
     EXPECT_NE(output.text().find("JSON Data is {\n    records = (\n        {\n            recordName = "
                                  "2/2/abababababababababababababababababababab;\n        }\n    );\n}\n"),
               std::string::npos);
-    EXPECT_NE(output.text().find(" Headers: {\n    Content-Type = application/json;\n}\n"), std::string::npos);
+    EXPECT_NE(output.text().find(" Headers: {\n    Content-Type = application/json;\n}\n"),
+              std::string::npos);
 }
 
 TEST_F(Lookup, WithoutACDHashEndsWith66BeforeTheNetwork) {
@@ -220,14 +224,15 @@ TEST_F(Lookup, AnEmptyBodyEndsWith68) {
 TEST_F(Lookup, AnAnswerThatIsNoHTTPResponseEndsWith68) {
     ASSERT_TRUE(grab());
     const auto completion = run.platform.https.sessions[0]->completions[0];
-    EXPECT_EQ(run.platform.exitStatusOf(
-                  [&] { completion(foundation::toData("{}"), std::nullopt, std::nullopt); }),
-              68);
+    EXPECT_EQ(
+        run.platform.exitStatusOf([&] { completion(foundation::toData("{}"), std::nullopt, std::nullopt); }),
+        68);
 }
 
 TEST_F(Lookup, TheStatusCodeIsNeverLookedAt) {
     ASSERT_TRUE(grab());
-    EXPECT_EQ(run.answer(ControllerRun::inlineAnswer(unsignedTicket({ControllerRun::fileHash()})), {}, 500), 0);
+    EXPECT_EQ(run.answer(ControllerRun::inlineAnswer(unsignedTicket({ControllerRun::fileHash()})), {}, 500),
+              0);
 }
 
 TEST_F(Lookup, A404WithAJSONErrorHasNoReasonAndNoTicket) {
@@ -235,8 +240,8 @@ TEST_F(Lookup, A404WithAJSONErrorHasNoReasonAndNoTicket) {
     const MessageCapture output(kVerbosityNormal);
     EXPECT_EQ(run.answer(R"({"error":"not found"})", {}, 404), 65);
     EXPECT_EQ(output.lines(),
-              (std::vector<std::string>{std::string("Lumora query for App.app (") + ControllerRun::kPrettyHash +
-                                            ") failed due to \"(null)\".",
+              (std::vector<std::string>{std::string("Lumora query for App.app (") +
+                                            ControllerRun::kPrettyHash + ") failed due to \"(null)\".",
                                         noTicketLine, failedStapleLine}));
 }
 
@@ -244,10 +249,10 @@ TEST_F(Lookup, AnUnknownRecordsReasonIsPrinted) {
     ASSERT_TRUE(grab());
     const MessageCapture output(kVerbosityNormal);
     EXPECT_EQ(run.answer(R"({"records":[{"recordName":"x","reason":"Record not found"}]})"), 65);
-    EXPECT_EQ(output.lines(),
-              (std::vector<std::string>{std::string("Lumora query for App.app (") + ControllerRun::kPrettyHash +
-                                            ") failed due to \"Record not found\".",
-                                        noTicketLine, failedStapleLine}));
+    EXPECT_EQ(output.lines(), (std::vector<std::string>{std::string("Lumora query for App.app (") +
+                                                            ControllerRun::kPrettyHash +
+                                                            ") failed due to \"Record not found\".",
+                                                        noTicketLine, failedStapleLine}));
 }
 
 TEST_F(Lookup, ABodyThatIsNoJSONHasNoTicket) {
@@ -280,7 +285,8 @@ TEST_F(Lookup, AnUnexpectedShapeIsReportedOnceAndEndsWith65) {
         ASSERT_TRUE(another.controller.grabTicket());
         const MessageCapture output(kVerbosityNormal);
         EXPECT_EQ(another.answer(body), 65) << body;
-        EXPECT_EQ(output.lines(), (std::vector<std::string>{badShapeLine, noTicketLine, failedStapleLine})) << body;
+        EXPECT_EQ(output.lines(), (std::vector<std::string>{badShapeLine, noTicketLine, failedStapleLine}))
+            << body;
     }
 }
 
@@ -306,9 +312,11 @@ TEST_F(Lookup, AnEmptyInlineTicketIsNoTicket) {
 TEST_F(Lookup, AnInlineTicketWinsOverAnAssetWhoseSizeIsStillKept) {
     ASSERT_TRUE(grab());
     const std::string ticket = foundation::encodeBase64(unsignedTicket({ControllerRun::fileHash()}));
-    EXPECT_EQ(run.answer(R"({"records":[{"fields":{"signedTicket":{"value":")" + ticket +
-                         R"("},"signedTicketAsset":{"value":{"downloadURL":"https://a.example/${f}","size":77}}}}]})"),
-              0);
+    EXPECT_EQ(
+        run.answer(
+            R"({"records":[{"fields":{"signedTicket":{"value":")" + ticket +
+            R"("},"signedTicketAsset":{"value":{"downloadURL":"https://a.example/${f}","size":77}}}}]})"),
+        0);
     EXPECT_EQ(run.controller.largeTicketSize(), Value(77));
     EXPECT_EQ(run.platform.https.sessions.size(), 1U);
 }
@@ -321,16 +329,17 @@ TEST_F(Lookup, TheTicketFileIsNamedAfterTheRequest) {
 }
 
 TEST_F(Lookup, AMissingOrUnusableRequestIdentifierIsReplacedByAUniqueString) {
-    for (const https::Headers& headers :
-         {https::Headers{}, https::Headers{{"X-Ostrel-Request-UUID", ""}},
-          https::Headers{{"X-Ostrel-Request-UUID", "../../etc/passwd"}},
-          https::Headers{{"X-Ostrel-Request-UUID", ".."}},
-          https::Headers{{"X-Ostrel-Request-UUID", std::string(201, 'a')}},
-          https::Headers{{"X-Ostrel-Request-UUID", "a\tb"}}}) {
+    for (const https::Headers& headers : {https::Headers{}, https::Headers{{"X-Ostrel-Request-UUID", ""}},
+                                          https::Headers{{"X-Ostrel-Request-UUID", "../../etc/passwd"}},
+                                          https::Headers{{"X-Ostrel-Request-UUID", ".."}},
+                                          https::Headers{{"X-Ostrel-Request-UUID", std::string(201, 'a')}},
+                                          https::Headers{{"X-Ostrel-Request-UUID", "a\tb"}}}) {
         ControllerRun another;
         another.controller.setOperation(kOperationStaple);
         ASSERT_TRUE(another.controller.grabTicket());
-        EXPECT_EQ(another.answer(ControllerRun::inlineAnswer(unsignedTicket({ControllerRun::fileHash()})), headers), 0);
+        EXPECT_EQ(
+            another.answer(ControllerRun::inlineAnswer(unsignedTicket({ControllerRun::fileHash()})), headers),
+            0);
         const std::string name = another.controller.tempFileURL()->lastPathComponent();
         EXPECT_EQ(another.controller.tempFileURL()->deletingLastPathComponent().path(),
                   another.platform.directory / "tmp");
@@ -353,10 +362,12 @@ TEST_F(Lookup, AnAnswerWithAnAssetStartsTheDownloadAndEndsNothingYet) {
 TEST_F(Lookup, AnAssetURLThatIsNoneEndsWith65) {
     ASSERT_TRUE(grab());
     const MessageCapture output(kVerbosityNormal);
-    EXPECT_EQ(run.answer(R"({"records":[{"fields":{"signedTicketAsset":{"value":{"downloadURL":"no url"}}}}]})"), 65);
+    EXPECT_EQ(
+        run.answer(R"({"records":[{"fields":{"signedTicketAsset":{"value":{"downloadURL":"no url"}}}}]})"),
+        65);
     EXPECT_EQ(output.lines(),
-              (std::vector<std::string>{"Large ticket was requested from an invalid URL: (null)", noTicketLine,
-                                        failedStapleLine}));
+              (std::vector<std::string>{"Large ticket was requested from an invalid URL: (null)",
+                                        noTicketLine, failedStapleLine}));
 }
 
 TEST_F(Lookup, AnEmptyAssetURLCountsAsNone) {

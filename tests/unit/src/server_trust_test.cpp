@@ -16,7 +16,8 @@ class ServerTrust : public testing::Test {
   protected:
     void SetUp() override {
         const trust::PolicyRef initial = trust::createPinnedServerPolicy("api.lumora.example");
-        trust::CertificateRef certificate = run.platform.trust.createCertificate(foundation::asBytes("server"));
+        trust::CertificateRef certificate =
+            run.platform.trust.createCertificate(foundation::asBytes("server"));
         ASSERT_EQ(run.platform.trust.createTrust({certificate}, initial, serverTrust), trust::kSuccess);
         run.platform.trust.policies.clear();
     }
@@ -26,12 +27,13 @@ class ServerTrust : public testing::Test {
         const auto session = run.platform.https.ephemeralSession(run.controller);
         int calls = 0;
         auto given = https::Disposition::performDefaultHandling;
-        run.controller.didReceiveChallenge(*session, {host, method, serverTrust},
-                                           [&](https::Disposition disposition, std::optional<https::Credential> made) {
-                                               ++calls;
-                                               given = disposition;
-                                               credential = std::move(made);
-                                           });
+        run.controller.didReceiveChallenge(
+            *session, {host, method, serverTrust},
+            [&](https::Disposition disposition, std::optional<https::Credential> made) {
+                ++calls;
+                given = disposition;
+                credential = std::move(made);
+            });
         EXPECT_EQ(calls, 1) << "the completion must be called exactly once";
         return given;
     }
@@ -63,15 +65,17 @@ TEST_F(ServerTrust, VerdictsProceedAndUnspecifiedBothCount) {
 }
 
 TEST_F(ServerTrust, EveryOtherVerdictIsRefusedAndPrintedAsItsNumber) {
-    for (const auto verdict : {trust::Verdict::invalid, trust::Verdict::deny, trust::Verdict::recoverableFailure,
-                               trust::Verdict::fatalFailure, trust::Verdict::otherError}) {
+    for (const auto verdict :
+         {trust::Verdict::invalid, trust::Verdict::deny, trust::Verdict::recoverableFailure,
+          trust::Verdict::fatalFailure, trust::Verdict::otherError}) {
         evaluations({{.verdict = verdict}});
         const MessageCapture output(kVerbosityNormal);
         EXPECT_EQ(judge(), https::Disposition::cancelChallenge);
         EXPECT_FALSE(credential.has_value());
-        EXPECT_EQ(output.lines()[0], foundation::format("Certificate trust evaluation did not return expected "
-                                                        "result. (%d) ",
-                                                        static_cast<std::uint32_t>(verdict)));
+        EXPECT_EQ(output.lines()[0],
+                  foundation::format("Certificate trust evaluation did not return expected "
+                                     "result. (%d) ",
+                                     static_cast<std::uint32_t>(verdict)));
     }
 }
 
@@ -79,7 +83,8 @@ TEST_F(ServerTrust, AServerThatFailsThePinnedPolicyMayPassTheCompatibilityPolicy
     evaluations({{.verdict = kRefused, .failureDescription = "marker missing"}, {}});
     const MessageCapture output(kVerbosityNormal);
     EXPECT_EQ(judge(), https::Disposition::useCredential);
-    EXPECT_EQ(output.text(), "Certificate trust evaluation did not return expected result. (5) marker missing\n");
+    EXPECT_EQ(output.text(),
+              "Certificate trust evaluation did not return expected result. (5) marker missing\n");
     ASSERT_EQ(run.platform.trust.policies.size(), 2U);
     EXPECT_EQ(run.platform.trust.policies[1]->options,
               trust::createCompatibilityServerPolicy("api.lumora.example")->options);
@@ -87,12 +92,14 @@ TEST_F(ServerTrust, AServerThatFailsThePinnedPolicyMayPassTheCompatibilityPolicy
 
 TEST_F(ServerTrust, AServerThatFailsBothIsReportedTwiceAndRefused) {
     const Error expired("TrustErrorDomain", 1, "expired");
-    evaluations({{.verdict = kRefused,
-                  .properties = {Dictionary{{"title", "leaf"}, {"error", expired}}, Dictionary{{"title", "root"}}},
-                  .failureDescription = "leaf: expired"}});
+    evaluations(
+        {{.verdict = kRefused,
+          .properties = {Dictionary{{"title", "leaf"}, {"error", expired}}, Dictionary{{"title", "root"}}},
+          .failureDescription = "leaf: expired"}});
     const MessageCapture output(kVerbosityNormal);
     EXPECT_EQ(judge(), https::Disposition::cancelChallenge);
-    const std::string first = "Certificate trust evaluation did not return expected result. (5) leaf: expired";
+    const std::string first =
+        "Certificate trust evaluation did not return expected result. (5) leaf: expired";
     for (const std::size_t at : {std::size_t{0}, std::size_t{2}}) {
         EXPECT_EQ(output.lines()[at], first);
         EXPECT_EQ(output.lines()[at + 1],
@@ -123,7 +130,8 @@ TEST_F(ServerTrust, APolicyThatCannotBeSetIsNotedAndTheNextOneTried) {
     run.platform.trust.setPolicyStatuses = {-50, trust::kSuccess};
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_EQ(judge(), https::Disposition::useCredential);
-    EXPECT_EQ(output.lines()[1].find("Could not set trust policy. Error Domain=OSStatusErrorDomain Code=-50"), 0U);
+    EXPECT_EQ(output.lines()[1].find("Could not set trust policy. Error Domain=OSStatusErrorDomain Code=-50"),
+              0U);
     EXPECT_EQ(run.platform.trust.evaluationCount, 1U);
 }
 
