@@ -7,6 +7,8 @@ find_package(fmt REQUIRED)
 find_package(nlohmann_json 3.10 REQUIRED)
 pkg_check_modules(GIO REQUIRED IMPORTED_TARGET gio-2.0>=2.66)
 pkg_check_modules(PLIST REQUIRED IMPORTED_TARGET libplist-2.0)
+find_package(LibXml2 2.9 REQUIRED)
+find_package(ZLIB REQUIRED)
 
 # The local record service alone.
 find_package(SQLiteCpp REQUIRED)

@@ -1,0 +1,135 @@
+#include "xar/archive.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <charconv>
+#include <utility>
+
+#include "xar/digest.h"
+#include "xar/inflater.h"
+
+namespace pinwell::xar {
+namespace {
+
+using foundation::Data;
+
+constexpr std::size_t kPieceSize = std::size_t{64} * 1024;
+
+template <class Call>
+auto uninterrupted(Call call) {
+    for (;;) {
+        const auto answer = call();
+        if (answer != -1 || errno != EINTR) return answer;
+    }
+}
+
+// A number at the start of a property's text, as strtoull(3) finds it, whatever follows; but with no digits,
+// a minus sign or too many digits there is none.
+std::optional<std::uint64_t> leadingNumber(const std::optional<std::string>& text) {
+    if (!text) return std::nullopt;
+    std::string_view rest = *text;
+    rest.remove_prefix(std::min(rest.find_first_not_of(" \t\n\v\f\r"), rest.size()));
+    if (rest.starts_with('+')) rest.remove_prefix(1);
+    std::uint64_t number = 0;
+    const auto result = std::from_chars(rest.data(), rest.data() + rest.size(), number);
+    return result.ec == std::errc{} ? std::optional(number) : std::nullopt;
+}
+
+}  // namespace
+
+std::unique_ptr<Archive> Archive::open(const std::string& path) {
+    std::unique_ptr<Archive> archive(new Archive);
+    if (!archive->openFile(path)) return nullptr;
+    const auto start = archive->read(
+        0, static_cast<std::size_t>(std::min<std::uint64_t>(kLongestHeaderRead, archive->fileSize_)));
+    const auto header = start ? parseHeader(*start) : std::nullopt;
+    if (!header || !archive->readTable(*header) || !archive->locateChecksum(header->algorithm))
+        return nullptr;
+    if (header->algorithm != DigestAlgorithm::none && archive->storedChecksum() != archive->computedChecksum_)
+        return nullptr;
+    return archive;
+}
+
+bool Archive::openFile(const std::string& path) {
+    // Opening alone can set a device to work, so the look comes first; the second one is for what has taken
+    // the file's place since, which O_NONBLOCK keeps from blocking us.
+    struct stat status {};
+    if (uninterrupted([&] { return stat(path.c_str(), &status); }) != 0 || !S_ISREG(status.st_mode))
+        return false;
+    constexpr int kFlags = O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY;
+    file_ = foundation::FileDescriptor(uninterrupted([&] { return ::open(path.c_str(), kFlags); }));
+    if (!file_ || fstat(file_.get(), &status) != 0 || !S_ISREG(status.st_mode)) return false;
+    fileSize_ = static_cast<std::uint64_t>(status.st_size);
+    return true;
+}
+
+// All of the bytes, or nothing.
+std::optional<Data> Archive::read(std::uint64_t offset, std::size_t length) const {
+    if (offset > fileSize_ || length > fileSize_ - offset) return std::nullopt;
+    Data bytes(length);
+    std::size_t had = 0;
+    while (had < length) {
+        const auto at = static_cast<off_t>(offset + had);
+        const ssize_t count =
+            uninterrupted([&] { return pread(file_.get(), &bytes[had], length - had, at); });
+        if (count <= 0) return std::nullopt;
+        had += static_cast<std::size_t>(count);
+    }
+    return bytes;
+}
+
+bool Archive::readTable(const Header& header) {
+    if (header.size > fileSize_ || header.compressedLength > fileSize_ - header.size) return false;
+    if (header.compressedLength > kMaximumTableOfContents) return false;
+
+    TableOfContentsReader reader;
+    Inflater inflater(kMaximumTableOfContents,
+                      [&](foundation::ByteView bytes) { return reader.feed(bytes); });
+    Digest digest(header.algorithm);
+    std::uint64_t at = header.size;
+    std::uint64_t rest = header.compressedLength;
+    while (rest > 0) {
+        const auto piece = read(at, static_cast<std::size_t>(std::min<std::uint64_t>(rest, kPieceSize)));
+        if (!piece || !inflater.feed(*piece)) return false;
+        digest.update(*piece);
+        at += piece->size();
+        rest -= piece->size();
+    }
+    auto table = inflater.complete() ? reader.finish() : std::nullopt;
+    if (!table) return false;
+    table_ = *std::move(table);
+    computedChecksum_ = digest.finish();
+    heapStart_ = at;
+    return true;
+}
+
+bool Archive::locateChecksum(DigestAlgorithm algorithm) {
+    const auto number = [&](std::string_view path, std::uint64_t otherwise) -> std::optional<std::uint64_t> {
+        const auto found = table_.properties.find(path);
+        if (found != table_.properties.end()) return leadingNumber(found->second);
+        // A signature would then sign bytes of which nobody has said where they stand.
+        return table_.signatures.empty() ? std::optional(otherwise) : std::nullopt;
+    };
+
+    const bool isDescribed = table_.properties.find("checksum") != table_.properties.end();
+    if (isDescribed || algorithm != DigestAlgorithm::none) {
+        if (!table_.checksumStyle || digestAlgorithmNamed(*table_.checksumStyle) != algorithm) return false;
+    }
+    const auto offset = number("checksum/offset", 0);
+    const auto size = number("checksum/size", digestSize(algorithm));
+    if (!offset || !size) return false;
+    if (algorithm != DigestAlgorithm::none && *size != digestSize(algorithm)) return false;
+    checksum_ = {*offset, *size};
+    return true;
+}
+
+std::optional<Data> Archive::storedChecksum() const {
+    if (checksum_.size > kLongestDigest || checksum_.offset > fileSize_ - heapStart_) return std::nullopt;
+    return read(heapStart_ + checksum_.offset, static_cast<std::size_t>(checksum_.size));
+}
+
+}  // namespace pinwell::xar
