@@ -2,6 +2,7 @@
 
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
+#include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "src/PWHashedFile/file_kind.h"
 #include "src/messages.h"
 
@@ -27,7 +28,7 @@ std::shared_ptr<PWHashedFile> PWHashedFile::initWithFileURL(const URL& fileURL, 
         case AssessmentClass::diskImage:
             return std::make_shared<PWHashedDiskImage>(fileURL, platform);
         case AssessmentClass::package:
-            break;
+            return std::make_shared<PWHashedFlatPackage>(fileURL, platform);
         case AssessmentClass::unknown:
             if (properties->isDirectory && platform.files.mainExecutableOfBundle(fileURL))
                 return std::make_shared<PWHashedBundle>(fileURL, platform);

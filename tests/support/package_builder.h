@@ -1,0 +1,54 @@
+// Flat packages: an archive, and the trailers behind it, in the order of the calls. Without any call it is a
+// signed archive and nothing else.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+
+#include "foundation/bytes.h"
+
+namespace pinwell::test {
+
+using foundation::Data;
+
+inline constexpr std::uint16_t kUnknownTrailerType = 7;
+
+/// One record; valid, and of an unknown type, as it is.
+struct TrailerFields {
+    std::string magic = "t8lr";
+    std::uint16_t version = 1;
+    std::uint16_t type = kUnknownTrailerType;
+    std::optional<std::uint32_t> length;  // without one: that of the data
+    std::uint32_t upperLength = 0;
+};
+
+/// Data and the record behind them.
+Data makeTrailer(const TrailerFields& fields, const Data& data = {});
+
+class PackageBuilder {
+  public:
+    PackageBuilder& archive(Data bytes);
+    PackageBuilder& terminator();
+    PackageBuilder& ticket(std::string_view bytes);
+    PackageBuilder& unknown(std::string_view bytes, std::uint16_t type = kUnknownTrailerType);
+    PackageBuilder& trailer(const TrailerFields& fields, const Data& data = {});
+
+    /// Bytes that belong to no trailer.
+    PackageBuilder& bytes(std::string_view text);
+
+    std::string build() const;
+
+    /// Length of the archive alone, in bytes.
+    std::size_t archiveSize() const { return archive_.size(); }
+
+  private:
+    PackageBuilder& append(const Data& bytes);
+
+    Data archive_ = defaultArchive();
+    Data trailers_;
+
+    static Data defaultArchive();
+};
+
+}  // namespace pinwell::test

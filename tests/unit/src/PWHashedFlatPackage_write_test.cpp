@@ -1,0 +1,315 @@
+// Stapling and unstapling packages.
+#include <gmock/gmock.h>
+
+#include <filesystem>
+
+#include "package_fixture.h"
+#include "support/archive_builder.h"
+
+namespace pinwell {
+namespace {
+
+using foundation::toData;
+using test::MessageCapture;
+using test::PackageBuilder;
+using testing::ElementsAre;
+using testing::StartsWith;
+
+class FlatPackageWriting : public test::FlatPackageTest {
+  protected:
+    FlatPackageWriting() {
+        newTicket("NEW TICKET");
+        platform.files.answerCloning(false);
+    }
+
+    void newTicket(std::string_view bytes) { test::writeFile(source.path(), bytes); }
+    bool staple(ErrorOut error = nullptr) { return package.writeNewTicketDataFromURL(source, error); }
+    bool unstaple(ErrorOut error = nullptr) { return package._deleteExistingTicket(error); }
+
+    /// The hook alone, in place: it hands out what the driver keeps to itself.
+    bool write(std::optional<Error>& error) {
+        return package._writeNewTicketDataFromURL(source, url, false, &error);
+    }
+
+    const foundation::URL source = platform.directory.url("new.ticket");
+};
+
+TEST_F(FlatPackageWriting, TheFirstStapleAppendsTerminatorTicketAndRecord) {
+    put(PackageBuilder());
+    package.setAppropriateExitCode(66);
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(contents(), PackageBuilder().terminator().ticket("NEW TICKET").build());
+    EXPECT_EQ(package.appropriateExitCode(), 0);
+    EXPECT_EQ(package.ticketStart(), PackageBuilder().archiveSize() + 16);
+}
+
+TEST_F(FlatPackageWriting, AnEmptyFileIsStapledLikeAnyOther) {
+    put("");
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(contents(), PackageBuilder().archive({}).terminator().ticket("NEW TICKET").build());
+}
+
+TEST_F(FlatPackageWriting, AShorterTicketTakesTheOldOnesPlaceAndTheFileShrinks) {
+    const std::string old = PackageBuilder().terminator().ticket("A MUCH LONGER OLD TICKET").build();
+    put(old);
+    const MessageCapture output(kVerbosityVerbose);
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(contents(), PackageBuilder().terminator().ticket("NEW TICKET").build());
+    EXPECT_EQ(output.lines().back(), "Truncating Sample.pkg from to " + std::to_string(old.size()) +
+                                         " bytes to " + std::to_string(contents().size()) + " bytes.");
+}
+
+TEST_F(FlatPackageWriting, ALongerTicketTakesTheOldOnesPlaceAndTheFileGrows) {
+    put(PackageBuilder().terminator().ticket("OLD"));
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(contents(), PackageBuilder().terminator().ticket("NEW TICKET").build());
+    EXPECT_EQ(platform.files.count("handle.truncate"), 0U);
+}
+
+TEST_F(FlatPackageWriting, ATicketOfTheSameLengthLeavesTheFilesLength) {
+    put(PackageBuilder().terminator().ticket("OLD TICKET"));
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(contents(), PackageBuilder().terminator().ticket("NEW TICKET").build());
+    EXPECT_EQ(platform.files.count("handle.truncate"), 0U);
+}
+
+TEST_F(FlatPackageWriting, AFreshObjectReadsTheTicketBack) {
+    put(PackageBuilder());
+    staple();
+    PWHashedFlatPackage fresh{url, platform.services()};
+    EXPECT_EQ(fresh.ticketData(), toData("NEW TICKET"));
+    EXPECT_EQ(package.ticketData(), std::nullopt) << "the first answer stays";
+}
+
+TEST_F(FlatPackageWriting, AnUnknownTrailerBehindTheTicketMovesInFrontOfTheNewOne) {
+    put(PackageBuilder().terminator().ticket("OLD").unknown("one").unknown("two", 9));
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(contents(),
+              PackageBuilder().terminator().unknown("one").unknown("two", 9).ticket("NEW TICKET").build());
+}
+
+TEST_F(FlatPackageWriting, AnUnknownTrailerBetweenTerminatorAndTicketStaysWhereItIs) {
+    put(PackageBuilder().terminator().unknown("one").ticket("OLD"));
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(contents(), PackageBuilder().terminator().unknown("one").ticket("NEW TICKET").build());
+}
+
+TEST_F(FlatPackageWriting, RestapledWithUnknownTrailersOnBothSidesKeepsBoth) {
+    put(PackageBuilder().terminator().unknown("one").ticket("OLD").unknown("two"));
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(contents(),
+              PackageBuilder().terminator().unknown("one").unknown("two").ticket("NEW TICKET").build());
+}
+
+TEST_F(FlatPackageWriting, AChainWithATerminatorButNoTicketIsWrittenFromOffset0) {
+    const std::string old = PackageBuilder().terminator().build();
+    put(old);
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(contents(), PackageBuilder().archive({}).ticket("NEW TICKET").build());
+    EXPECT_LT(contents().size(), old.size());
+    EXPECT_EQ(package.appropriateExitCode(), 0);
+}
+
+TEST_F(FlatPackageWriting, AChainOfUnknownTrailersAloneIsWrittenFromOffset0AsWell) {
+    put(PackageBuilder().terminator().unknown("one"));
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(contents(), PackageBuilder().archive({}).unknown("one").ticket("NEW TICKET").build());
+}
+
+TEST_F(FlatPackageWriting, WhereTheVolumeClonesTheNewFileIsSwappedIn) {
+    platform.files.answerCloning(true);
+    put(PackageBuilder());
+    std::optional<Error> error = Error::osStatus(1);
+    EXPECT_TRUE(staple(&error));
+    EXPECT_EQ(contents(), PackageBuilder().terminator().ticket("NEW TICKET").build());
+    EXPECT_EQ(platform.files.count("replaceItem"), 1U);
+    EXPECT_FALSE(error.has_value());
+}
+
+TEST_F(FlatPackageWriting, WhereTheVolumeClonesAFailedWriteLeavesThePackageAlone) {
+    platform.files.answerCloning(true);
+    put(PackageBuilder());
+    platform.files.fail("handle.write", ENOSPC);
+    EXPECT_FALSE(staple());
+    EXPECT_EQ(contents(), PackageBuilder().build());
+    EXPECT_EQ(package.appropriateExitCode(), 73);
+    EXPECT_EQ(platform.files.count("replaceItem"), 0U);
+}
+
+TEST_F(FlatPackageWriting, ATicketFileThatCannotBeReadIsRefusedWithItsError) {
+    put(PackageBuilder());
+    std::filesystem::remove(source.path());
+    std::optional<Error> error;
+    const MessageCapture output(kVerbosityVerbose);
+    EXPECT_FALSE(write(error));
+    EXPECT_THAT(output.lines(),
+                ElementsAre(StartsWith("Cannot add a new ticket to Sample.pkg. Error Domain=")));
+    EXPECT_EQ(package.appropriateExitCode(), 73);
+    EXPECT_EQ(error->code(), ENOENT);
+    EXPECT_EQ(contents(), PackageBuilder().build());
+}
+
+TEST_F(FlatPackageWriting, AnEmptyTicketFileIsRefusedWithoutAnError) {
+    put(PackageBuilder());
+    newTicket("");
+    std::optional<Error> error = Error::osStatus(1);
+    const MessageCapture output(kVerbosityVerbose);
+    EXPECT_FALSE(write(error));
+    EXPECT_EQ(output.text(), "Cannot add a new ticket to Sample.pkg. (null)\n");
+    EXPECT_EQ(package.appropriateExitCode(), 73);
+    EXPECT_FALSE(error.has_value());
+}
+
+TEST_F(FlatPackageWriting, NoTicketFileAtAllIsRefused) {
+    put(PackageBuilder());
+    const MessageCapture output(kVerbosityVerbose);
+    EXPECT_FALSE(package._writeNewTicketDataFromURL(std::nullopt, url, false, nullptr));
+    EXPECT_EQ(output.text(), "Cannot add a new ticket to Sample.pkg. (null)\n");
+    EXPECT_EQ(package.appropriateExitCode(), 73);
+    EXPECT_EQ(platform.files.count("openForReading"), 0U) << "refused before the trailers are looked at";
+}
+
+TEST_F(FlatPackageWriting, ATargetThatCannotBeOpenedIsReportedWithItsError) {
+    put(PackageBuilder());
+    platform.files.fail("openForUpdating", EACCES);
+    std::optional<Error> error;
+    const MessageCapture output(kVerbosityVerbose);
+    EXPECT_FALSE(write(error));
+    EXPECT_THAT(output.lines().back(),
+                StartsWith("Could not create file handle to " + path + ". Error Domain="));
+    EXPECT_EQ(package.appropriateExitCode(), 73);
+    EXPECT_EQ(error->code(), EACCES);
+}
+
+TEST_F(FlatPackageWriting, EveryStepThatFailsIsAFatalErrorWith73AndWithoutAnErrorToHandOut) {
+    for (const char* step : {"handle.seek", "handle.write", "handle.position", "handle.truncate",
+                             "handle.synchronize", "handle.close"}) {
+        put(PackageBuilder().terminator().ticket("A MUCH LONGER OLD TICKET").unknown("one"));
+        PWHashedFlatPackage file{url, platform.services()};
+        ASSERT_TRUE(file.ticketData().has_value());
+        platform.files.fail(step, EIO);
+        std::optional<Error> error = Error::osStatus(1);
+        const MessageCapture output(kVerbosityVerbose);
+        EXPECT_FALSE(file._writeNewTicketDataFromURL(source, url, false, &error)) << step;
+        EXPECT_THAT(output.lines().back(),
+                    StartsWith("Fatal error while writing new ticket to " + path + ". Cannot "))
+            << step;
+        EXPECT_EQ(file.appropriateExitCode(), 73) << step;
+        EXPECT_FALSE(error.has_value()) << step;
+        platform.files.fail(step, 0);
+    }
+}
+
+// Fails each handle operation of a first staple in turn, until none fails any more.
+TEST_F(FlatPackageWriting, AFirstStapleThatFailsAtAnyOperationEndsWith73OrSucceedsWhole) {
+    bool succeeded = false;
+    for (std::size_t n = 0; !succeeded; ++n) {
+        ASSERT_LT(n, 20U);
+        put(PackageBuilder());
+        PWHashedFlatPackage file{url, platform.services()};
+        file.ticketData();
+        const std::size_t opened = platform.files.operations().size() + 2;  // behind the read of the ticket
+        platform.files.failOperation(opened + n, EIO);
+        std::string lastLine;
+        {
+            const MessageCapture output(kVerbosityVerbose);
+            succeeded = file._writeNewTicketDataFromURL(source, url, false, nullptr);
+            if (!succeeded) lastLine = output.lines().back();
+        }
+        if (succeeded) {
+            EXPECT_EQ(contents(), PackageBuilder().terminator().ticket("NEW TICKET").build());
+            EXPECT_EQ(n, 8U) << "seekToEnd, write, position, write, write, position, synchronize, close";
+        } else {
+            EXPECT_EQ(file.appropriateExitCode(), 73) << n;
+            EXPECT_THAT(lastLine, StartsWith("Fatal error while writing new ticket to ")) << n;
+        }
+    }
+}
+
+TEST_F(FlatPackageWriting, DeletingRemovesTheTicketAndLeavesTheTerminator) {
+    put(PackageBuilder().terminator().ticket("OLD"));
+    package.setAppropriateExitCode(66);
+    const MessageCapture output(kVerbosityVerbose);
+    EXPECT_TRUE(unstaple());
+    EXPECT_EQ(contents(), PackageBuilder().terminator().build());
+    EXPECT_EQ(package.appropriateExitCode(), 0);
+    EXPECT_EQ(output.lines().front(),
+              "Attempting to delete the existing ticket attatched Sample.pkg. Let's see how that works out.");
+}
+
+TEST_F(FlatPackageWriting, DeletingKeepsTheUnknownTrailersOnBothSides) {
+    put(PackageBuilder().terminator().unknown("one").ticket("OLD").unknown("two"));
+    EXPECT_TRUE(unstaple());
+    EXPECT_EQ(contents(), PackageBuilder().terminator().unknown("one").unknown("two").build());
+}
+
+TEST_F(FlatPackageWriting, DeletingWhereTheVolumeClonesSwapsTheCloneIn) {
+    platform.files.answerCloning(true);
+    put(PackageBuilder().terminator().ticket("OLD"));
+    EXPECT_TRUE(unstaple());
+    EXPECT_EQ(contents(), PackageBuilder().terminator().build());
+    EXPECT_EQ(platform.files.count("replaceItem"), 1U);
+}
+
+TEST_F(FlatPackageWriting, DeletingATicketThatIsNotThereFailsAndLeavesTheFileUntouched) {
+    for (const PackageBuilder& ticketless :
+         {PackageBuilder(), PackageBuilder().terminator().unknown("one")}) {
+        put(ticketless);
+        PWHashedFlatPackage file{url, platform.services()};
+        std::optional<Error> error = Error::osStatus(1);
+        const MessageCapture output(kVerbosityVerbose);
+        EXPECT_FALSE(file._writeNewTicketDataFromURL(std::nullopt, url, true, &error));
+        EXPECT_EQ(output.lines().back(),
+                  "Cannot delete an existing ticket in Sample.pkg that doesn't exist.");
+        EXPECT_EQ(file.appropriateExitCode(), 73);
+        EXPECT_FALSE(error.has_value());
+        EXPECT_EQ(contents(), ticketless.build());
+    }
+    EXPECT_THAT(platform.files.changes(), ElementsAre());
+}
+
+TEST_F(FlatPackageWriting, DeletingThroughTheBaseWithoutATicketFailsWith73) {
+    put(PackageBuilder());
+    EXPECT_FALSE(unstaple());
+    EXPECT_EQ(package.appropriateExitCode(), 73);
+    EXPECT_EQ(contents(), PackageBuilder().build());
+}
+
+TEST_F(FlatPackageWriting, ADeletionThatFailsSaysThatItWasOne) {
+    put(PackageBuilder().terminator().ticket("OLD"));
+    platform.files.fail("handle.truncate", EIO);
+    const MessageCapture output(kVerbosityVerbose);
+    EXPECT_FALSE(unstaple());
+    EXPECT_THAT(output.lines().back(),
+                StartsWith("Fatal error while deleting existing ticket to " + path + ". Cannot truncate "));
+    EXPECT_EQ(package.appropriateExitCode(), 73);
+}
+
+TEST_F(FlatPackageWriting, WhatADeletionLeavesIsStapledFromOffset0) {
+    put(PackageBuilder().terminator().ticket("OLD"));
+    EXPECT_TRUE(unstaple());
+    PWHashedFlatPackage fresh{url, platform.services()};
+    EXPECT_TRUE(fresh.writeNewTicketDataFromURL(source, nullptr));
+    EXPECT_EQ(contents(), PackageBuilder().archive({}).ticket("NEW TICKET").build());
+}
+
+TEST_F(FlatPackageWriting, StapledTwiceIsTheSameAsOnce) {
+    put(PackageBuilder());
+    staple();
+    const std::string once = contents();
+    PWHashedFlatPackage fresh{url, platform.services()};
+    EXPECT_TRUE(fresh.writeNewTicketDataFromURL(source, nullptr));
+    EXPECT_EQ(contents(), once);
+}
+
+TEST_F(FlatPackageWriting, TheWholeFileIsFlushedBeforeSuccessIsReported) {
+    put(PackageBuilder());
+    staple();
+    const auto names = platform.files.names();
+    ASSERT_GE(names.size(), 2U);
+    EXPECT_EQ(names[names.size() - 2], "handle.synchronize");
+    EXPECT_EQ(names.back(), "handle.close");
+}
+
+}  // namespace
+}  // namespace pinwell
