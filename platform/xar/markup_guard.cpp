@@ -31,7 +31,7 @@ MarkupGuard::State MarkupGuard::next(char c) {
     if (c == '\0') return State::refused;
     if (state_ == State::start || state_ == State::text) {
         if (c == '<') {
-            markup_ = "<";
+            markup_.assign(1, c);
             tail_.clear();
             length_ = 1;
             attributes_ = 0;

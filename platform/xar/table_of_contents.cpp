@@ -1,6 +1,7 @@
 #include "xar/table_of_contents.h"
 
 #include <libxml/SAX2.h>
+#include <libxml/dict.h>
 #include <libxml/parser.h>
 
 #include <algorithm>
@@ -75,6 +76,8 @@ class TableOfContentsReader::Parser {
         // IGNORE_ENC holds the document to the encoding in which the guard has read it.
         xmlCtxtUseOptions(context_.get(), XML_PARSE_NONET | XML_PARSE_NOENT | XML_PARSE_IGNORE_ENC |
                                               XML_PARSE_NOERROR | XML_PARSE_NOWARNING);
+        // Its own limit leaves room for a million names, which it looks up in ever longer lists.
+        xmlDictSetLimit(context_->dict, kMaximumNames);
     }
 
     bool feed(ByteView bytes) {
@@ -85,7 +88,7 @@ class TableOfContentsReader::Parser {
 
     std::optional<TableOfContents> finish() {
         xmlParseChunk(context_.get(), nullptr, 0, 1);
-        if (!isWellFormed() || refused_ || !found_) return std::nullopt;
+        if (!isWellFormed() || refused_ || !found_ || depth_ != 0) return std::nullopt;
         return std::move(table_);
     }
 
@@ -106,8 +109,9 @@ class TableOfContentsReader::Parser {
 
     static constexpr std::size_t kChildOfTable = 3;
 
-    // Not the status that the parser returns, to which an undeclared name-space prefix is an error.
-    bool isWellFormed() const { return context_->wellFormed != 0; }
+    // Not the status that the parser returns, to which an undeclared name-space prefix is an error. And a parser
+    // that ran out of memory or names has stopped, without a word on what it has not seen.
+    bool isWellFormed() const { return context_->wellFormed != 0 && context_->disableSAX == 0; }
 
     // Nothing may be thrown through the parser, which is C.
     template <class Action>

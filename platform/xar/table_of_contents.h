@@ -39,6 +39,9 @@ inline constexpr std::size_t kMaximumElements = std::size_t{1} << 22U;
 inline constexpr std::size_t kMaximumSignatures = std::size_t{1} << 16U;
 inline constexpr std::size_t kMaximumProperties = std::size_t{1} << 12U;
 
+/// Distinct names of elements, attributes and prefixes: their length together, in bytes.
+inline constexpr std::size_t kMaximumNames = std::size_t{1} << 20U;
+
 /// Length of a property's path, in bytes.
 inline constexpr std::size_t kMaximumPath = 1024;
 

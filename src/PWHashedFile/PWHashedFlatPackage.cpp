@@ -35,9 +35,8 @@ Data readAt(FileHandle& file, std::uint64_t offset, std::uint64_t length) {
     return file.read(length);
 }
 
-void mustFit(std::uint64_t length, std::uint64_t room) {
-    if (length > room)
-        throw FileHandleError(foundation::format("More than %llu bytes are not read", kMaximumTrailerData));
+void mustNotExceed(std::uint64_t limit, std::uint64_t length) {
+    if (length > limit) throw FileHandleError(foundation::format("More than %llu bytes are not read", limit));
 }
 
 }  // namespace
@@ -89,7 +88,7 @@ std::optional<Data> PWHashedFlatPackage::walkTrailers(FileHandle& file) {
                 break;
             }
             NoisyLog("Found unknown trailer type %d. Adding %llu bytes to append.", record.type(), total);
-            mustFit(total, kMaximumTrailerData - unknown.size());
+            mustNotExceed(kMaximumUnknownTrailers, unknown.size() + total);
             const Data trailer = readAt(file, start, total);
             if (trailer.size() != total)
                 NoisyLog("Data read for unknown trailer does not match expected size. %lu vs %llu.",
@@ -114,7 +113,7 @@ std::optional<Data> PWHashedFlatPackage::readTicket(FileHandle& file, std::uint6
     ticketLength_ = length;
     NoisyLog("Found expected ticket at %llu with length of %d", start, length);
     try {
-        mustFit(length, kMaximumTrailerData);
+        mustNotExceed(kMaximumTicket, length);
         return readAt(file, start, length);
     } catch (const FileHandleError& failure) {
         NoisyLog("Couldn't read existing ticket of %@. %@.", name(), failure.what());

@@ -9,9 +9,11 @@
 
 namespace pinwell {
 
-/// Longest ticket that is read, and most that unknown trailers may come to together, in bytes. No ticket
-/// comes near it, and a sparse file can claim any length.
-inline constexpr std::uint64_t kMaximumTrailerData = files::kMaximumWholeFile;
+/// Longest ticket that is read, in bytes. None comes near it, and a sparse file can claim any length.
+inline constexpr std::uint64_t kMaximumTicket = files::kMaximumWholeFile;
+
+/// Most that unknown trailers may come to together, in bytes: a million of them when they are all empty.
+inline constexpr std::uint64_t kMaximumUnknownTrailers = 16ULL * 1024 * 1024;
 
 /// What was found describes the file as it was when its trailers were read, which the first ticketData()
 /// does; nothing is read again after a write.

@@ -330,7 +330,7 @@ void putSparse(const std::string& path, std::uintmax_t size, const std::string& 
 TEST_F(FlatPackage, ThatClaimsATicketLongerThanAnyIsSparedReadingIt) {
     TrailerFields fields;
     fields.type = 2;
-    fields.length = kMaximumTrailerData + 1;
+    fields.length = kMaximumTicket + 1;
     putSparse(path, std::uintmax_t{1} << 40U, PackageBuilder().archive({}).trailer(fields).build());
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_EQ(package.ticketData(), std::nullopt);
@@ -341,7 +341,7 @@ TEST_F(FlatPackage, ThatClaimsATicketLongerThanAnyIsSparedReadingIt) {
 
 TEST_F(FlatPackage, ThatClaimsMoreUnknownDataThanCanBeKeptKeepsNone) {
     TrailerFields fields;
-    fields.length = kMaximumTrailerData - 16 - 19 + 1;  // one byte too many beside the trailer behind it
+    fields.length = kMaximumUnknownTrailers - 16 - 19 + 1;  // one byte too many beside the trailer behind it
     putSparse(path, std::uintmax_t{1} << 40U,
               PackageBuilder().archive({}).trailer(fields).unknown("one").build());
     const MessageCapture output(kVerbosityVerbose);
@@ -350,7 +350,7 @@ TEST_F(FlatPackage, ThatClaimsMoreUnknownDataThanCanBeKeptKeepsNone) {
     EXPECT_EQ(package.dataToAppend(), std::nullopt);
     EXPECT_EQ(
         output.lines().back(),
-        "Couldn't read existing package trailers of Sample.pkg. More than 67108864 bytes are not read.");
+        "Couldn't read existing package trailers of Sample.pkg. More than 16777216 bytes are not read.");
 }
 
 TEST_F(FlatPackage, TheTrailersAreReadOncePerObject) {

@@ -131,7 +131,7 @@ TEST_F(ArchiveOpening, OfATableUpTo64MiBSucceedsAndOfALongerOneIsRefused) {
     std::string document = tocWith("");
     document.insert(document.size() - 6, kLimit - document.size(), ' ');  // before "</xar>"
     EXPECT_TRUE(opensWithToc(document));
-    document.insert(document.size() - 6, " ");
+    document.insert(document.size() - 6, 1, ' ');
     EXPECT_FALSE(opensWithToc(document));
 }
 
@@ -239,6 +239,17 @@ TEST_F(ArchiveOpening, OfMoreThanFourMillionElementsIsRefused) {
     };
     EXPECT_TRUE(opensWithToc(table(kLimit)));
     EXPECT_FALSE(opensWithToc(table(kLimit + 1)));
+}
+
+// The parser would look each up in lists that grow with their number.
+TEST_F(ArchiveOpening, OfMoreThanAMebibyteOfDistinctNamesIsRefused) {
+    const auto table = [](std::size_t count) {
+        std::string files;
+        for (std::size_t i = 0; i < count; ++i) files += "<a" + std::to_string(i) + "/>";
+        return tocWith("<file>" + files + "</file>");
+    };
+    EXPECT_TRUE(opensWithToc(table(50'000)));
+    EXPECT_FALSE(opensWithToc(table(500'000)));
 }
 
 TEST_F(ArchiveOpening, OfMoreThan65536SignaturesIsRefusedSinceNoneMayBeDropped) {
