@@ -1,5 +1,5 @@
 #include "fixture.h"
-#include "volume.h"
+#include "support/volume.h"
 
 namespace pinwell::test {
 namespace {

@@ -5,7 +5,7 @@
 #include <array>
 
 #include "fixture.h"
-#include "volume.h"
+#include "support/volume.h"
 
 namespace pinwell::test {
 namespace {

@@ -9,7 +9,7 @@
 
 #include "files/file_manager.h"
 #include "fixture.h"
-#include "volume.h"
+#include "support/volume.h"
 
 namespace pinwell::test {
 namespace {

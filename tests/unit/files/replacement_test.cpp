@@ -1,7 +1,7 @@
 #include <unistd.h>
 
 #include "fixture.h"
-#include "volume.h"
+#include "support/volume.h"
 
 namespace pinwell::test {
 namespace {

@@ -4,7 +4,7 @@
 #include <filesystem>
 
 #include "fixture.h"
-#include "volume.h"
+#include "support/volume.h"
 
 #if defined(__has_feature)
 #if __has_feature(address_sanitizer)

@@ -1,4 +1,4 @@
-#include "volume.h"
+#include "support/volume.h"
 
 #include <sched.h>
 #include <sys/mount.h>
