@@ -1,12 +1,12 @@
 #include "artefacts.h"
 
-#include <random>
 #include <utility>
 
 #include "foundation/byte_writer.h"
 #include "support/archive_builder.h"
 #include "support/code_directory_builder.h"
 #include "support/disk_image_builder.h"
+#include "support/file_properties.h"
 #include "support/package_builder.h"
 #include "support/temporary_directory.h"
 
@@ -59,10 +59,7 @@ TicketPayloadBuilder Artefact::payload() const {
 }
 
 Data irregularData(std::size_t count) {
-    std::mt19937 numbers(20261120);
-    Data bytes(count);
-    for (std::byte& byte : bytes) byte = static_cast<std::byte>(numbers());
-    return bytes;
+    return foundation::toData(irregularBytes(count));
 }
 
 Artefact signedImage(const Data& data) {

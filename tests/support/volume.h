@@ -11,7 +11,8 @@ namespace pinwell::test {
 /// A fresh volume, mounted where only this process sees it, and gone with it at the latest.
 class Volume {
   public:
-    /// `fileSystem` is how it is made: "xfs", "xfs -m reflink=0", "btrfs", or "tmpfs" of one MiB.
+    /// `fileSystem` is how it is made: "xfs", "xfs -m reflink=0", "btrfs", "ext4", or "tmpfs" of one
+    /// MiB.
     explicit Volume(const std::string& fileSystem);
     ~Volume();
     Volume(const Volume&) = delete;

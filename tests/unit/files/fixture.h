@@ -4,20 +4,17 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
-#include <sys/stat.h>
 
 #include <memory>
-#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
 
 #include "files/file_manager.h"
+#include "support/file_properties.h"
 #include "support/temporary_directory.h"
 
 namespace pinwell::test {
-
-bool isSuperuser();
 
 /// Rights of an ordinary user for as long as it lives, with `directories` given to that user. Nothing is
 /// changed in a test run that is an ordinary user's anyway.
@@ -40,29 +37,8 @@ class AsOrdinaryUser {
     bool changed_ = false;
 };
 
-struct stat statusOf(const std::string& path);
-bool exists(const std::string& path);
-mode_t permissionsOf(const std::string& path);
-
-/// Names in the directory, sorted.
-std::vector<std::string> namesIn(const std::string& directory);
-
 /// Numbers of open files of the process.
 std::size_t openFileCount();
-
-void makeDirectory(const std::string& path, mode_t mode = 0755);
-void makeLink(const std::string& target, const std::string& path);
-void makeFifo(const std::string& path);
-void setMode(const std::string& path, mode_t mode);
-void setAttribute(const std::string& path, const std::string& name, std::string_view value);
-std::optional<std::string> attribute(const std::string& path, const std::string& name);
-
-/// An access control list (acl(5), "system.posix_acl_access") that lets user 12345 read: rw-, r--, mask r--,
-/// ---.
-std::string listThatLetsAnotherRead();
-
-/// Bytes without any regularity that a copy could live on.
-std::string irregularBytes(std::size_t count);
 
 class FilesTest : public testing::Test {
   protected:

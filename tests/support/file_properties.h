@@ -1,0 +1,37 @@
+// Short words for making files of every kind and for looking at them. What cannot be done throws
+// std::system_error.
+#pragma once
+
+#include <sys/stat.h>
+
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace pinwell::test {
+
+bool isSuperuser();
+
+struct stat statusOf(const std::string& path);
+bool exists(const std::string& path);
+mode_t permissionsOf(const std::string& path);
+
+/// Names in the directory, sorted.
+std::vector<std::string> namesIn(const std::string& directory);
+
+void makeDirectory(const std::string& path, mode_t mode = 0755);
+void makeLink(const std::string& target, const std::string& path);
+void makeFifo(const std::string& path);
+void setMode(const std::string& path, mode_t mode);
+void setAttribute(const std::string& path, const std::string& name, std::string_view value);
+std::optional<std::string> attribute(const std::string& path, const std::string& name);
+
+/// An access control list (acl(5), "system.posix_acl_access") that lets user 12345 read: rw-, r--, mask r--,
+/// ---.
+std::string listThatLetsAnotherRead();
+
+/// Bytes without any regularity that a copy could live on.
+std::string irregularBytes(std::size_t count);
+
+}  // namespace pinwell::test
