@@ -2,16 +2,22 @@
 #include "artefacts.h"
 
 #include "fixture.h"
+#include "support/file_properties.h"
 
 namespace pinwell::test {
 namespace {
 
+using testing::Contains;
 using testing::ElementsAre;
+using testing::EndsWith;
+using testing::IsEmpty;
+
+constexpr std::size_t kDataSize = 100'000;
 
 class FileArtefact : public EndToEndTest, public testing::WithParamInterface<Artefact (*)(const Data&)> {
   protected:
     Artefact artefact = [this] {
-        Artefact made = GetParam()(irregularData(100'000));
+        Artefact made = GetParam()(irregularData(kDataSize));
         return writeArtefact(made, directory / ("work/" + made.name));
     }();
 };
@@ -33,6 +39,21 @@ TEST_P(FileArtefact, StapledByHandIsValid) {
     writeFile(artefact.path, artefact.stapledWith(ticket));
     EXPECT_THAT(pinwell({"validate", artefact.path}),
                 Ended(0, ElementsAre("Processing: " + artefact.path, "The validate action worked!")));
+}
+
+TEST_P(FileArtefact, LeavesTheTicketAmongTheTemporaryFilesAndWhatAnImageCanBeRepairedWith) {
+    serveTicket(sealed(artefact.payload()));
+    ASSERT_EQ(pinwell({"staple", artefact.path}).exitStatus, 0);
+    std::vector<std::string> left = temporaryFiles();
+    ASSERT_THAT(left, Contains("REQUEST.ticket"));
+    std::erase(left, "REQUEST.ticket");
+    if (artefact.name == "Signed.pkg") {
+        EXPECT_THAT(left, IsEmpty());
+        return;
+    }
+    ASSERT_THAT(left, ElementsAre(EndsWith(".dmgData")));
+    EXPECT_EQ(readFile(temporaryPath(left.front())), readFile(artefact.path).substr(kDataSize));
+    EXPECT_EQ(permissionsOf(temporaryPath(left.front())), 0600U);
 }
 
 INSTANTIATE_TEST_SUITE_P(OfEveryKind, FileArtefact,

@@ -8,10 +8,10 @@
 #include <linux/fs.h>
 #include <sys/ioctl.h>
 #include <sys/mount.h>
-#include <sys/statvfs.h>
 #include <unistd.h>
 
 #include <array>
+#include <cctype>
 #include <cerrno>
 #include <cstring>
 #include <system_error>
@@ -29,7 +29,6 @@ using testing::Contains;
 using testing::ElementsAre;
 using testing::IsEmpty;
 using testing::MatchesRegex;
-using testing::StartsWith;
 using testing::Values;
 
 constexpr std::size_t kBlock = 4096;
@@ -63,7 +62,7 @@ Place placeOf(const std::string& path, std::uint64_t offset) {
 /// The places of some whole blocks of the data.
 std::vector<std::uint64_t> dataPlacesOf(const std::string& path) {
     std::vector<std::uint64_t> places;
-    for (const std::size_t block : {0, 31, 63}) places.push_back(placeOf(path, block * kBlock).physical);
+    for (const std::size_t block : {0U, 31U, 63U}) places.push_back(placeOf(path, block * kBlock).physical);
     return places;
 }
 
@@ -89,19 +88,22 @@ class Volumes : public EndToEndTest, public testing::WithParamInterface<std::tup
   protected:
     void SetUp() override {
         if (volume.missing()) GTEST_SKIP() << *volume.missing();
-        removeAll(volume / "lost+found");
-        artefact = writeArtefact(std::get<Maker>(GetParam())(irregularData(kDataSize)), volume / "file");
+        artefact = std::get<Maker>(GetParam())(irregularData(kDataSize));
         artefact = writeArtefact(artefact, volume / artefact.name);
-        removeAll(volume / "file");
         ticket = sealed(artefact.payload());
     }
 
-    static void removeAll(const std::string& path) { std::filesystem::remove_all(path); }
-    bool isImage() const { return artefact.name.ends_with(".dmg"); }
-
-    ProcessResult stapleOn() {
+    ProcessResult stapleArtefact() {
         serveTicket(ticket);
         return pinwell({"staple", artefact.path});
+    }
+    ProcessResult validateArtefact() const { return pinwell({"validate", artefact.path}); }
+
+    /// What is on the volume now, less what the file system itself keeps there.
+    std::vector<std::string> names() const {
+        std::vector<std::string> found = namesIn(volume.path());
+        std::erase(found, "lost+found");
+        return found;
     }
     testing::Matcher<const ProcessResult&> Worked() const {
         const std::string processing = "Processing: " + artefact.path;
@@ -115,6 +117,178 @@ class Volumes : public EndToEndTest, public testing::WithParamInterface<std::tup
     Artefact artefact;
     Data ticket;
 };
+
+TEST_P(Volumes, KeepWhatAnArtefactIsBesidesItsContents) {
+    const std::string& path = artefact.path;
+    ASSERT_EQ(chown(path.c_str(), 1234, 2345), 0);
+    setAttribute(path, "user.origin", "somewhere");
+    setAttribute(path, kAccessControlList, listThatLetsAnotherRead());
+    const auto before = statusOf(path);
+
+    ASSERT_THAT(stapleArtefact(), Worked());
+    const auto after = statusOf(path);
+    EXPECT_EQ(after.st_uid, 1234U);
+    EXPECT_EQ(after.st_gid, 2345U);
+    EXPECT_EQ(after.st_mode, before.st_mode);
+    EXPECT_EQ(attribute(path, "user.origin"), "somewhere");
+    EXPECT_EQ(attribute(path, kAccessControlList), listThatLetsAnotherRead());
+}
+
+TEST_P(Volumes, DateAnArtefactFromItsStapling) {
+    constexpr timespec kLongAgo{1'000'000'000, 0};
+    const std::array<timespec, 2> times{kLongAgo, kLongAgo};
+    ASSERT_EQ(utimensat(AT_FDCWD, artefact.path.c_str(), times.data(), 0), 0);
+    writeFile(volume / "earlier", "x");
+
+    ASSERT_THAT(stapleArtefact(), Worked());
+    const timespec stapledAt = statusOf(artefact.path).st_mtim;
+    EXPECT_FALSE(isEarlier(stapledAt, statusOf(volume / "earlier").st_mtim));
+    writeFile(volume / "later", "x");
+    EXPECT_FALSE(isEarlier(statusOf(volume / "later").st_mtim, stapledAt));
+}
+
+TEST_P(Volumes, HoldNothingButTheArtefactAfterwards) {
+    ASSERT_THAT(stapleArtefact(), Worked());
+    EXPECT_THAT(names(), ElementsAre(artefact.name));
+    EXPECT_THAT(namesBelow(directory / "home"), IsEmpty());
+}
+
+TEST_P(Volumes, TakeAnotherTicketInPlaceOfTheFirst) {
+    ticket = sealed(artefact.payload().entry(2, hashOf(0x11)).entry(2, hashOf(0x22)));
+    ASSERT_THAT(stapleArtefact(), Worked());
+    EXPECT_EQ(readFile(artefact.path), artefact.stapledWith(ticket));
+    ticket = sealed(artefact.payload());
+    ASSERT_THAT(stapleArtefact(), Worked());
+    EXPECT_EQ(readFile(artefact.path), artefact.stapledWith(ticket));
+    EXPECT_THAT(names(), ElementsAre(artefact.name));
+    EXPECT_THAT(validateArtefact(), Ended(0, Contains("The validate action worked!")));
+}
+
+TEST_P(Volumes, AreNotWrittenToByAValidation) {
+    writeFile(artefact.path, artefact.stapledWith(ticket));
+    serveTicket(ticket);
+    ASSERT_EQ(mount(nullptr, volume.path().c_str(), nullptr, MS_REMOUNT | MS_RDONLY, nullptr), 0);
+    EXPECT_THAT(validateArtefact(), Ended(0, Contains("The validate action worked!")));
+    EXPECT_THAT(names(), ElementsAre(artefact.name));
+}
+
+TEST_P(Volumes, ThatAreReadOnlyKeepTheArtefactAsItIs) {
+    ASSERT_EQ(mount(nullptr, volume.path().c_str(), nullptr, MS_REMOUNT | MS_RDONLY, nullptr), 0);
+    EXPECT_THAT(stapleArtefact(), FailedToWrite());
+    EXPECT_EQ(readFile(artefact.path), artefact.contents);
+    EXPECT_THAT(names(), ElementsAre(artefact.name));
+}
+
+INSTANTIATE_TEST_SUITE_P(OfEveryKind, Volumes,
+                         Combine(Values("xfs", "btrfs", "xfs -m reflink=0", "ext4", "tmpfs"),
+                                 Values(&signedImage, &unsignedImage, &signedPackage)),
+                         Volumes::nameOf);
+
+using CloningVolumes = Volumes;
+
+TEST_P(CloningVolumes, SwapTheArtefactForACloneThatSharesItsData) {
+    const std::string other = volume / "other name";
+    ASSERT_EQ(link(artefact.path.c_str(), other.c_str()), 0);
+    const auto inode = statusOf(artefact.path).st_ino;
+    const auto places = dataPlacesOf(artefact.path);
+    ASSERT_FALSE(placeOf(artefact.path, 0).shared);
+
+    ASSERT_THAT(stapleArtefact(), Worked());
+    EXPECT_EQ(readFile(artefact.path), artefact.stapledWith(ticket));
+    EXPECT_NE(statusOf(artefact.path).st_ino, inode);
+    EXPECT_EQ(dataPlacesOf(artefact.path), places);
+    EXPECT_TRUE(placeOf(artefact.path, 0).shared);
+}
+
+TEST_P(CloningVolumes, LeaveTheArtefactAsItWasToItsOtherNames) {
+    const std::string other = volume / "other name";
+    ASSERT_EQ(link(artefact.path.c_str(), other.c_str()), 0);
+    const auto inode = statusOf(artefact.path).st_ino;
+
+    ASSERT_THAT(stapleArtefact(), Worked());
+    EXPECT_EQ(readFile(other), artefact.contents);
+    EXPECT_EQ(statusOf(other).st_ino, inode);
+    EXPECT_EQ(statusOf(other).st_nlink, 1U);
+    EXPECT_EQ(statusOf(artefact.path).st_nlink, 1U);
+}
+
+INSTANTIATE_TEST_SUITE_P(OfEveryKind, CloningVolumes,
+                         Combine(Values("xfs", "btrfs"),
+                                 Values(&signedImage, &unsignedImage, &signedPackage)),
+                         Volumes::nameOf);
+
+using PlainVolumes = Volumes;
+
+TEST_P(PlainVolumes, HaveTheArtefactItselfWrittenTo) {
+    const std::string other = volume / "other name";
+    ASSERT_EQ(link(artefact.path.c_str(), other.c_str()), 0);
+    const auto inode = statusOf(artefact.path).st_ino;
+
+    ASSERT_THAT(stapleArtefact(), Worked());
+    EXPECT_EQ(readFile(artefact.path), artefact.stapledWith(ticket));
+    EXPECT_EQ(statusOf(artefact.path).st_ino, inode);
+    EXPECT_EQ(statusOf(other).st_ino, inode);
+    EXPECT_EQ(statusOf(other).st_nlink, 2U);
+}
+
+INSTANTIATE_TEST_SUITE_P(OfEveryKind, PlainVolumes,
+                         Combine(Values("xfs -m reflink=0", "ext4", "tmpfs"),
+                                 Values(&signedImage, &unsignedImage, &signedPackage)),
+                         Volumes::nameOf);
+
+// A volume with room for a clone, which takes none, and not for a ticket of this size.
+constexpr std::size_t kRoom = 128 * kBlock;
+constexpr unsigned kEntriesBeyondTheRoom = 2 * kRoom / 21;
+
+class FullVolume : public Volumes {
+  protected:
+    void SetUp() override {
+        Volumes::SetUp();
+        if (IsSkipped()) return;
+        TicketPayloadBuilder payload = artefact.payload();
+        for (unsigned i = 0; i < kEntriesBeyondTheRoom; ++i) payload.entry(2, hashOf(0x77));
+        ticket = sealed(payload);
+        fill();
+    }
+
+  private:
+    /// Takes all space but kRoom.
+    void fill() const {
+        const foundation::FileDescriptor file(
+            open((volume / "filling").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600));
+        off_t taken = 0;
+        for (off_t piece = 256 * 1024 * 1024; piece >= static_cast<off_t>(kBlock); piece /= 2)
+            while (fallocate(file.get(), 0, taken, piece) == 0) taken += piece;
+        ASSERT_EQ(ftruncate(file.get(), taken - static_cast<off_t>(kRoom)), 0);
+    }
+};
+
+using FullCloningVolume = FullVolume;
+
+TEST_P(FullCloningVolume, KeepsTheArtefactAsItIs) {
+    const auto inode = statusOf(artefact.path).st_ino;
+    EXPECT_THAT(stapleArtefact(), FailedToWrite());
+    EXPECT_EQ(readFile(artefact.path), artefact.contents);
+    EXPECT_EQ(statusOf(artefact.path).st_ino, inode);
+    EXPECT_THAT(names(), ElementsAre(MatchesRegex("\\.pinwell-replacement-.{6}"), artefact.name, "filling"));
+}
+
+INSTANTIATE_TEST_SUITE_P(OfEveryKind, FullCloningVolume,
+                         Combine(Values("xfs"), Values(&signedImage, &unsignedImage, &signedPackage)),
+                         Volumes::nameOf);
+
+using FullPlainVolume = FullVolume;
+
+TEST_P(FullPlainVolume, LosesNoneOfTheArtefactsOwnData) {
+    EXPECT_THAT(stapleArtefact(), FailedToWrite());
+    EXPECT_EQ(readFile(artefact.path).substr(0, kDataSize), artefact.contents.substr(0, kDataSize));
+    EXPECT_THAT(names(), ElementsAre(artefact.name, "filling"));
+}
+
+INSTANTIATE_TEST_SUITE_P(OfEveryKind, FullPlainVolume,
+                         Combine(Values("ext4", "tmpfs"),
+                                 Values(&signedImage, &unsignedImage, &signedPackage)),
+                         Volumes::nameOf);
 
 }  // namespace
 }  // namespace pinwell::test
