@@ -290,7 +290,7 @@ void serveConnection(HttpEngine& engine, TlsConnection& connection, const Server
 }  // namespace
 
 Server::Server(const LookupService& lookups, const TlsContext& context, LogLine accessLog, LogLine errorLog,
-               ServerLimits limits)
+               const ServerLimits& limits)
     : lookups_(lookups),
       context_(context),
       accessLog_(std::move(accessLog)),

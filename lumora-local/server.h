@@ -28,7 +28,7 @@ class Server {
     /// References must outlive the server. `accessLog` gets one line per request, `errorLog` one for each
     /// request that failed through our own fault; both come from any worker, several at a time.
     Server(const LookupService& lookups, const TlsContext& context, LogLine accessLog, LogLine errorLog,
-           ServerLimits limits = {});
+           const ServerLimits& limits = {});
 
     /// Serves until `stopDescriptor` is readable (which nobody may undo), then refuses new connections, lets
     /// the requests that have begun finish, closes the idle connections, and returns.

@@ -34,9 +34,8 @@ Data ByteSource::read(std::uint64_t offset, std::size_t length) const {
     return bytes;
 }
 
-FileSource::FileSource(const std::string& path) {
-    file_ = foundation::FileDescriptor(
-        open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
+FileSource::FileSource(const std::string& path)
+    : file_(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC | O_NOCTTY)) {
     if (!file_) throw CodeError(statusForOpen(errno), "cannot open the file");
     struct stat status = {};
     if (fstat(file_.get(), &status) != 0) throw CodeError(kIOError, "cannot examine the file");

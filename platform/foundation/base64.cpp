@@ -30,7 +30,7 @@ bool decodeGroup(std::string_view group, Data& out) {
     const std::size_t bytes = group.size() - 1;
     // What the padding cuts off must be zero, or one buffer would have several spellings.
     if ((bits & (0xFFFFFFU >> (8U * bytes))) != 0) return false;
-    for (unsigned i = 0; i < bytes; ++i) out.push_back(static_cast<std::byte>(bits >> (16U - 8U * i)));
+    for (std::size_t i = 0; i < bytes; ++i, bits <<= 8U) out.push_back(static_cast<std::byte>(bits >> 16U));
     return true;
 }
 

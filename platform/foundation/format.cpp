@@ -18,7 +18,8 @@ std::string formatInteger(std::string_view specification, const Conversion& conv
     if (conversion.letter == 'd' || conversion.letter == 'i') {
         std::int64_t value = static_cast<std::int64_t>(argument.integer);
         if (conversion.wants == ArgumentKind::int32) value = static_cast<std::int32_t>(argument.integer);
-        if (conversion.wants == ArgumentKind::int8) value = static_cast<std::int8_t>(argument.integer);
+        if (conversion.wants == ArgumentKind::int8)
+            value = std::int64_t{static_cast<std::int8_t>(argument.integer)};  // NOLINT(*-signed-char-misuse)
         flags += "lld";
         written = std::snprintf(field, sizeof field, flags.c_str(), static_cast<long long>(value));
     } else {

@@ -12,6 +12,8 @@ namespace pinwell::foundation {
 class LazyLibrary {
   public:
     explicit LazyLibrary(const char* name);
+    LazyLibrary(const LazyLibrary&) = delete;
+    LazyLibrary& operator=(const LazyLibrary&) = delete;
 
     /// Whether it could be opened, and every function asked for so far was there.
     bool isComplete() const noexcept { return complete_; }

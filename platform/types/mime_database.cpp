@@ -120,7 +120,7 @@ std::optional<std::string> mimeTypeForExtension(std::string_view extension) {
     const bool isKnown = type != nullptr && !gio().contentTypeIsUnknown(type.get()) &&
                          std::string_view(type.get()) != "application/x-zerosize" && isWellFormed(type.get());
     if (!isKnown) return std::nullopt;
-    return type.get();
+    return std::string(type.get());
 }
 
 std::optional<std::string> mimeDescription(const std::string& mimeType) {

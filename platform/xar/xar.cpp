@@ -77,7 +77,8 @@ uint8_t xar_signature_copy_signed_data(xar_signature_t sig, uint8_t** data, uint
     try {
         const auto checksum = sig->archive->contents->storedChecksum();
         if (!checksum || checksum->empty()) return kFailed;
-        auto* const copy = static_cast<uint8_t*>(std::malloc(checksum->size()));
+        // The caller frees it, as the prototype says.
+        auto* const copy = static_cast<uint8_t*>(std::malloc(checksum->size()));  // NOLINT(*-no-malloc)
         if (copy == nullptr) return kFailed;
         std::transform(checksum->begin(), checksum->end(), copy,
                        [](std::byte byte) { return std::to_integer<uint8_t>(byte); });

@@ -23,7 +23,7 @@ struct CloseArchive {
 using Archive = std::unique_ptr<std::remove_pointer_t<xar_t>, CloseArchive>;
 
 struct Free {
-    void operator()(std::uint8_t* bytes) const noexcept { std::free(bytes); }
+    void operator()(std::uint8_t* bytes) const noexcept { std::free(bytes); }  // NOLINT(*-no-malloc)
 };
 using CopiedBytes = std::unique_ptr<std::uint8_t, Free>;
 
