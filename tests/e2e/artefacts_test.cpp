@@ -1,8 +1,10 @@
-// The everyday run over each kind of file.
+// The life of a ticket on each kind of file.
 #include "artefacts.h"
 
 #include "fixture.h"
+#include "support/archive_builder.h"
 #include "support/file_properties.h"
+#include "support/package_builder.h"
 
 namespace pinwell::test {
 namespace {
@@ -20,30 +22,53 @@ class FileArtefact : public EndToEndTest, public testing::WithParamInterface<Art
         Artefact made = GetParam()(irregularData(kDataSize));
         return writeArtefact(made, directory / ("work/" + made.name));
     }();
+
+    ProcessResult staple() const { return pinwell({"staple", artefact.path}); }
+    ProcessResult validate() const { return pinwell({"validate", artefact.path}); }
+
+    std::string processing() const { return "Processing: " + artefact.path; }
+    std::string refusal() const { return "Could not validate ticket for " + artefact.path; }
+    std::string revokedLine() const {
+        return "The ticket for " + artefact.name +
+               " has been revoked. Tollmark will prevent it from running.";
+    }
+    testing::Matcher<const ProcessResult&> Worked() const {
+        return Ended(0, ElementsAre(processing(), processing(), "The staple and validate action worked!"));
+    }
+
+    Data ticketOf(const TicketPayloadBuilder& payload) const { return sealed(payload); }
+    /// Lists much other software as well.
+    TicketPayloadBuilder longPayload() const {
+        TicketPayloadBuilder payload = artefact.payload();
+        for (std::uint8_t i = 0; i < 200; ++i) payload.entry(2, hashOf(i));
+        return payload;
+    }
+
+    /// After each the file is exactly what it would be if it had never carried another.
+    void staplesInTurn(const std::vector<Data>& tickets) {
+        for (const Data& ticket : tickets) {
+            serveTicket(ticket);
+            EXPECT_THAT(staple(), Worked());
+            EXPECT_EQ(readFile(artefact.path), artefact.stapledWith(ticket));
+            EXPECT_THAT(validate(), Ended(0, ElementsAre(processing(), "The validate action worked!")));
+        }
+    }
 };
 
 TEST_P(FileArtefact, IsStapledAndValidated) {
-    const Data ticket = sealed(artefact.payload());
-    serveTicket(ticket);
-    const std::string processing = "Processing: " + artefact.path;
-    EXPECT_THAT(pinwell({"staple", artefact.path}),
-                Ended(0, ElementsAre(processing, processing, "The staple and validate action worked!")));
-    EXPECT_EQ(readFile(artefact.path), artefact.stapledWith(ticket));
-    EXPECT_THAT(pinwell({"validate", artefact.path}),
-                Ended(0, ElementsAre(processing, "The validate action worked!")));
+    staplesInTurn({ticketOf(artefact.payload())});
 }
 
 TEST_P(FileArtefact, StapledByHandIsValid) {
-    const Data ticket = sealed(artefact.payload());
+    const Data ticket = ticketOf(artefact.payload());
     serveTicket(ticket);
     writeFile(artefact.path, artefact.stapledWith(ticket));
-    EXPECT_THAT(pinwell({"validate", artefact.path}),
-                Ended(0, ElementsAre("Processing: " + artefact.path, "The validate action worked!")));
+    EXPECT_THAT(validate(), Ended(0, ElementsAre(processing(), "The validate action worked!")));
 }
 
 TEST_P(FileArtefact, LeavesTheTicketAmongTheTemporaryFilesAndWhatAnImageCanBeRepairedWith) {
-    serveTicket(sealed(artefact.payload()));
-    ASSERT_EQ(pinwell({"staple", artefact.path}).exitStatus, 0);
+    serveTicket(ticketOf(artefact.payload()));
+    ASSERT_THAT(staple(), Worked());
     std::vector<std::string> left = temporaryFiles();
     ASSERT_THAT(left, Contains("REQUEST.ticket"));
     std::erase(left, "REQUEST.ticket");
@@ -56,12 +81,147 @@ TEST_P(FileArtefact, LeavesTheTicketAmongTheTemporaryFilesAndWhatAnImageCanBeRep
     EXPECT_EQ(permissionsOf(temporaryPath(left.front())), 0600U);
 }
 
+// Stapled again.
+
+TEST_P(FileArtefact, TakesALongerTicketInPlaceOfTheOldOne) {
+    staplesInTurn({ticketOf(artefact.payload()), ticketOf(longPayload())});
+}
+
+TEST_P(FileArtefact, TakesAShorterTicketInPlaceOfTheOldOne) {
+    staplesInTurn({ticketOf(longPayload()), ticketOf(artefact.payload())});
+}
+
+TEST_P(FileArtefact, TakesTheSameTicketAgainAndIsAsItWas) {
+    const Data ticket = ticketOf(artefact.payload());
+    staplesInTurn({ticket, ticket});
+}
+
+TEST_P(FileArtefact, TakesATicketThatIsDownloadedAsAFileOfItsOwn) {
+    const Data ticket = ticketOf(longPayload());
+    serveAsset(ticket);
+    EXPECT_THAT(staple(), Worked());
+    EXPECT_EQ(readFile(artefact.path), artefact.stapledWith(ticket));
+    EXPECT_EQ(service().requests().size(), 2U);
+}
+
+// Refused.
+
+TEST_P(FileArtefact, WithoutATicketDoesNotValidate) {
+    serveTicket(ticketOf(artefact.payload()));
+    EXPECT_THAT(validate(), Ended(65, ElementsAre(processing(),
+                                                  artefact.name + " does not have a ticket stapled to it.")));
+    EXPECT_EQ(readFile(artefact.path), artefact.contents);
+}
+
+TEST_P(FileArtefact, IsLeftAloneWhenTheTicketIsForOthers) {
+    serveTicket(ticketForOthers());
+    EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(), refusal(), stapleFailed(65))));
+    EXPECT_EQ(readFile(artefact.path), artefact.contents);
+}
+
+TEST_P(FileArtefact, IsLeftAloneWhenTheTicketRevokesIt) {
+    serveTicket(ticketOf(artefact.payload().revoked()));
+    EXPECT_THAT(staple(), Ended(77, ElementsAre(processing(), refusal(), revokedLine())));
+    EXPECT_EQ(readFile(artefact.path), artefact.contents);
+}
+
+TEST_P(FileArtefact, RevokedSinceItWasStapledDoesNotValidate) {
+    serveTicket(ticketOf(artefact.payload()));
+    ASSERT_THAT(staple(), Worked());
+    const std::string stapled = readFile(artefact.path);
+    serveTicket(ticketOf(artefact.payload().revoked()));
+    EXPECT_THAT(validate(), Ended(77, ElementsAre(processing(), refusal(), revokedLine())));
+    EXPECT_EQ(readFile(artefact.path), stapled);
+}
+
+TEST_P(FileArtefact, ThatCarriesARevokedTicketDoesNotValidateWhateverTheServiceSays) {
+    writeFile(artefact.path, artefact.stapledWith(ticketOf(artefact.payload().revoked())));
+    serveTicket(ticketOf(artefact.payload()));
+    EXPECT_THAT(validate(), Ended(77, Contains(revokedLine())));
+}
+
+TEST_P(FileArtefact, ThatCarriesADamagedTicketIsPutRightByStaplingIt) {
+    const Data ticket = ticketOf(artefact.payload());
+    Data damaged = ticket;
+    damaged.back() ^= std::byte{1};
+    damaged[damaged.size() / 2] ^= std::byte{1};
+    writeFile(artefact.path, artefact.stapledWith(damaged));
+    serveTicket(ticket);
+    EXPECT_THAT(validate(), Ended(65, ElementsAre(processing())));
+    EXPECT_THAT(staple(), Worked());
+    EXPECT_EQ(readFile(artefact.path), artefact.stapledWith(ticket));
+    EXPECT_THAT(validate(), Ended(0, ElementsAre(processing(), "The validate action worked!")));
+}
+
 INSTANTIATE_TEST_SUITE_P(OfEveryKind, FileArtefact,
                          testing::Values(&signedImage, &unsignedImage, &signedPackage), [](const auto& kind) {
                              const std::string name = kind.param({}).name;  // "Signed.dmg"
                              return name.substr(0, name.find('.')) +
                                     (name.ends_with("dmg") ? "Image" : "Package");
                          });
+
+// Packages: what else stands behind the archive.
+
+class Package : public EndToEndTest {
+  protected:
+    const ArchiveBuilder archive = ArchiveBuilder().signature("CMS").afterChecksum(irregularData(kDataSize));
+    const Data ticket = sealed(TicketPayloadBuilder().entry(1, archive.rightChecksum()));
+    const std::string path = directory / "work/Sample.pkg";
+
+    PackageBuilder package() const { return PackageBuilder().archive(archive.build()); }
+    static std::string text(const Data& bytes) { return foundation::toString(bytes); }
+
+    /// What stapling `ticket` makes of the package.
+    std::string stapled(const PackageBuilder& package) {
+        writeFile(path, package.build());
+        serveTicket(ticket);
+        const std::string processing = "Processing: " + path;
+        EXPECT_THAT(pinwell({"staple", path}),
+                    Ended(0, ElementsAre(processing, processing, "The staple and validate action worked!")));
+        EXPECT_THAT(pinwell({"validate", path}),
+                    Ended(0, ElementsAre(processing, "The validate action worked!")));
+        return readFile(path);
+    }
+};
+
+TEST_F(Package, KeepsAnUnknownTrailerInFrontOfTheTicket) {
+    EXPECT_EQ(stapled(package().terminator().unknown("ABC").ticket("THE OLD TICKET")),
+              package().terminator().unknown("ABC").ticket(text(ticket)).build());
+}
+
+TEST_F(Package, MovesAnUnknownTrailerFromBehindTheTicketToItsFront) {
+    EXPECT_EQ(stapled(package().terminator().ticket("THE OLD TICKET").unknown("ABC")),
+              package().terminator().unknown("ABC").ticket(text(ticket)).build());
+}
+
+TEST_F(Package, KeepsUnknownTrailersOnBothSidesInTheirOrder) {
+    EXPECT_EQ(
+        stapled(package().terminator().unknown("A").ticket("THE OLD TICKET").unknown("B", 8).unknown("C", 9)),
+        package().terminator().unknown("A").unknown("B", 8).unknown("C", 9).ticket(text(ticket)).build());
+}
+
+TEST_F(Package, WhoseChecksumIsSHA256IsRefused) {
+    // The archive's digest is taken whole, 32 bytes; a ticket's entries have 20, so that none is its own.
+    const ArchiveBuilder other = ArchiveBuilder().digest("sha256").signature("CMS");
+    const std::string contents = PackageBuilder().archive(other.build()).build();
+    Data entry = other.rightChecksum();
+    entry.resize(20);
+    writeFile(path, contents);
+    serveTicket(sealed(TicketPayloadBuilder().entry(2, entry)));
+    EXPECT_THAT(pinwell({"staple", path}),
+                Ended(65, ElementsAre("Processing: " + path, "Could not validate ticket for " + path,
+                                      stapleFailed(65))));
+    EXPECT_EQ(readFile(path), contents);
+}
+
+TEST_F(Package, ThatIsNotSignedCarriesNoTicket) {
+    const std::string contents = PackageBuilder().archive(ArchiveBuilder().build()).build();
+    writeFile(path, contents);
+    serveTicket(ticket);
+    EXPECT_THAT(pinwell({"staple", path}), Ended(66, Contains("Processing: " + path)));
+    EXPECT_EQ(readFile(path), contents);
+    EXPECT_EQ(service().requests().size(), 0U);
+}
 
 }  // namespace
 }  // namespace pinwell::test

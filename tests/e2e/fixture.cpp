@@ -41,6 +41,15 @@ std::string inlineRecord(const Data& ticket) {
            foundation::encodeBase64(ticket) + R"("}}}]})";
 }
 
+std::string assetRecord(const std::string& urlTemplate, const std::string& size) {
+    return R"({"records":[{"fields":{"signedTicketAsset":{"value":{"downloadURL":")" + urlTemplate + '"' +
+           (size.empty() ? "" : ",\"size\":" + size) + "}}}}]}";
+}
+
+std::string assetRecord(const std::string& urlTemplate, std::size_t size) {
+    return assetRecord(urlTemplate, std::to_string(size));
+}
+
 EndToEndTest::EndToEndTest() : bundle(directory / "work/Sample.app") {
     const Data codeDirectory = CodeDirectoryBuilder().covers(2, emptyRequirements()).build();
     hash = codeHashOf(2, codeDirectory);
@@ -114,6 +123,17 @@ HostileServer& EndToEndTest::startService(const ServerIdentity& identity, const 
 
 void EndToEndTest::serve(Response response) {
     service().setHandler([response](const RecordedRequest&) { return response; });
+}
+
+void EndToEndTest::serveAsset(const std::string& record, const Response& asset) {
+    service().setHandler([record, asset](const RecordedRequest& request) {
+        return request.method == "POST" ? answer(record) : asset;
+    });
+}
+
+void EndToEndTest::serveAsset(const Data& ticket) {
+    serveAsset(assetRecord(service().url("/assets/${f}"), ticket.size()),
+               {.body = foundation::toString(ticket)});
 }
 
 TicketPayloadBuilder EndToEndTest::payload() const {

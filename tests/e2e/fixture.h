@@ -46,6 +46,11 @@ Response answer(std::string body);
 /// The body of an answer whose record holds this ticket.
 std::string inlineRecord(const Data& ticket);
 
+/// The body of an answer whose record names where a ticket can be had; `size` is JSON, or left out when
+/// empty.
+std::string assetRecord(const std::string& urlTemplate, const std::string& size);
+std::string assetRecord(const std::string& urlTemplate, std::size_t size);
+
 class EndToEndTest : public testing::Test {
   protected:
     EndToEndTest();
@@ -94,6 +99,10 @@ class EndToEndTest : public testing::Test {
     /// Every request is answered so.
     void serve(Response response);
     void serveTicket(const Data& ticket) { serve(answer(inlineRecord(ticket))); }
+    /// The lookup is answered with this record; what comes after it, with `asset`.
+    void serveAsset(const std::string& record, const Response& asset);
+    /// A ticket of its own file, as announced, from the record service's own host.
+    void serveAsset(const Data& ticket);
 
     // Tickets.
 

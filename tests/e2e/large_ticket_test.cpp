@@ -19,26 +19,6 @@ constexpr const char* kWorked = "The staple and validate action worked!";
 
 class LargeTicket : public EndToEndTest {
   protected:
-    static std::string assetRecord(const std::string& urlTemplate, const std::string& size) {
-        return R"({"records":[{"fields":{"signedTicketAsset":{"value":{"downloadURL":")" + urlTemplate + '"' +
-               (size.empty() ? "" : ",\"size\":" + size) + "}}}}]}";
-    }
-    static std::string assetRecord(const std::string& urlTemplate, std::size_t size) {
-        return assetRecord(urlTemplate, std::to_string(size));
-    }
-
-    /// The lookup is answered with this record; what comes after it, with `asset`.
-    void deliver(const std::string& record, const Response& asset) {
-        service().setHandler([record, asset](const RecordedRequest& request) {
-            return request.method == "POST" ? answer(record) : asset;
-        });
-    }
-    /// As announced, from the record service's own host.
-    void deliver(const Data& ticket) {
-        deliver(assetRecord(service().url("/assets/${f}"), ticket.size()),
-                {.body = foundation::toString(ticket)});
-    }
-
     /// A run whose download fails says so and then does nothing more, for ever.
     void expectParked(const Matcher<std::string>& line) const {
         RunningProcess run(command({"staple", bundle}));
@@ -68,7 +48,7 @@ class LargeTicket : public EndToEndTest {
 };
 
 TEST_F(LargeTicket, IsFetchedAndStapled) {
-    deliver(genuine);
+    serveAsset(genuine);
     EXPECT_THAT(staple(), Worked());
     EXPECT_EQ(stapled(), genuine);
     EXPECT_THAT(temporaryFiles(), ElementsAre("REQUEST.ticket"));
@@ -85,13 +65,13 @@ TEST_F(LargeTicket, MayBeLarge) {
     for (std::uint32_t i = 0; i < 100000; ++i) many.entry(2, hashOf(static_cast<std::uint8_t>(i)));
     const Data large = sealed(many);
     ASSERT_GT(large.size(), 2000000U);
-    deliver(large);
+    serveAsset(large);
     EXPECT_THAT(staple(), Worked());
     EXPECT_EQ(stapled(), large);
 }
 
 TEST_F(LargeTicket, SaysWhatItFetchesInVerboseMode) {
-    deliver(genuine);
+    serveAsset(genuine);
     EXPECT_THAT(
         pinwell({"staple", "-v", bundle}),
         Ended(0, AllOf(Contains("URL of large ticket asset: " + service().url("/assets/lmasset.ticket")),
@@ -102,7 +82,7 @@ TEST_F(LargeTicket, SaysWhatItFetchesInVerboseMode) {
 
 TEST_F(LargeTicket, CompletesAValidation) {
     stapleByHand(genuine);
-    deliver(ticket());
+    serveAsset(ticket());
     EXPECT_THAT(validate(), Ended(0, ElementsAre(processing(), "The validate action worked!")));
     EXPECT_EQ(stapled(), genuine);
 }
@@ -111,21 +91,21 @@ TEST_F(LargeTicket, CompletesAValidation) {
 
 TEST_F(LargeTicket, EveryTokenOfTheTemplateIsReplaced) {
     const Response asset{.body = foundation::toString(genuine)};
-    deliver(assetRecord(service().url("/${f}/x/${f}?n=${f}"), genuine.size()), asset);
+    serveAsset(assetRecord(service().url("/${f}/x/${f}?n=${f}"), genuine.size()), asset);
     EXPECT_THAT(staple(), Worked());
     EXPECT_EQ(service().requests().back().target, "/lmasset.ticket/x/lmasset.ticket?n=lmasset.ticket");
 }
 
 TEST_F(LargeTicket, ATemplateWithoutTheTokenIsUsedAsItIs) {
     const Response asset{.body = foundation::toString(genuine)};
-    deliver(assetRecord(service().url("/plain?a=$f"), genuine.size()), asset);
+    serveAsset(assetRecord(service().url("/plain?a=$f"), genuine.size()), asset);
     EXPECT_THAT(staple(), Worked());
     EXPECT_EQ(service().requests().back().target, "/plain?a=$f");
 }
 
 TEST_F(LargeTicket, ATemplateThatMakesNoURLIsSaidSoAndNoTicketIsFound) {
     for (const char* text : {"not a URL", "https://", "${f}", "https://host/%zz", "https://host/a b"}) {
-        deliver(assetRecord(text, 7), {});
+        serveAsset(assetRecord(text, 7), {});
         EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(),
                                                     "Large ticket was requested from an invalid URL: (null)",
                                                     noTicketLine(), stapleFailed(65))))
@@ -138,7 +118,7 @@ TEST_F(LargeTicket, ATemplateThatMakesNoURLIsSaidSoAndNoTicketIsFound) {
 TEST_F(LargeTicket, OfAnotherSizeThanAnnouncedIsRefused) {
     const Response asset{.body = foundation::toString(genuine)};
     for (const std::size_t announced : {genuine.size() - 1, genuine.size() + 1, std::size_t{0}}) {
-        deliver(assetRecord(service().url("/${f}"), announced), asset);
+        serveAsset(assetRecord(service().url("/${f}"), announced), asset);
         EXPECT_THAT(staple(),
                     Ended(65, ElementsAre(processing(), sizeLine(std::to_string(announced), genuine.size()),
                                           stapleFailed(65))));
@@ -147,7 +127,7 @@ TEST_F(LargeTicket, OfAnotherSizeThanAnnouncedIsRefused) {
 }
 
 TEST_F(LargeTicket, WithoutAnAnnouncedSizeIsRefused) {
-    deliver(assetRecord(service().url("/${f}"), ""), {.body = foundation::toString(genuine)});
+    serveAsset(assetRecord(service().url("/${f}"), ""), {.body = foundation::toString(genuine)});
     EXPECT_THAT(staple(),
                 Ended(65, ElementsAre(processing(), sizeLine("(null)", genuine.size()), stapleFailed(65))));
 }
@@ -155,23 +135,23 @@ TEST_F(LargeTicket, WithoutAnAnnouncedSizeIsRefused) {
 TEST_F(LargeTicket, ASizeThatIsNoNumberIsRefused) {
     const std::size_t got = genuine.size();
     const Response asset{.body = foundation::toString(genuine)};
-    deliver(assetRecord(service().url("/${f}"), "-1"), asset);
+    serveAsset(assetRecord(service().url("/${f}"), "-1"), asset);
     EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(), sizeLine("-1", got), stapleFailed(65))));
-    deliver(assetRecord(service().url("/${f}"), "1e300"), asset);
+    serveAsset(assetRecord(service().url("/${f}"), "1e300"), asset);
     EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(), testing::_, stapleFailed(65))));
-    deliver(assetRecord(service().url("/${f}"), "18446744073709551616"), asset);
+    serveAsset(assetRecord(service().url("/${f}"), "18446744073709551616"), asset);
     EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(), testing::_, stapleFailed(65))));
 }
 
 TEST_F(LargeTicket, AMissingAssetOfAnotherSizeIsAMatterOfSize) {
-    deliver(assetRecord(service().url("/${f}"), genuine.size()), {.status = 404, .body = "Not found"});
+    serveAsset(assetRecord(service().url("/${f}"), genuine.size()), {.status = 404, .body = "Not found"});
     EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(), sizeLine(std::to_string(genuine.size()), 9),
                                                 stapleFailed(65))));
 }
 
 TEST_F(LargeTicket, AnErrorOfTheAnnouncedSizeIsAMatterOfStatus) {
-    deliver(assetRecord(service().url("/${f}"), genuine.size()),
-            {.status = 500, .body = foundation::toString(genuine)});
+    serveAsset(assetRecord(service().url("/${f}"), genuine.size()),
+               {.status = 500, .body = foundation::toString(genuine)});
     EXPECT_THAT(
         staple(),
         Ended(68,
@@ -182,14 +162,14 @@ TEST_F(LargeTicket, AnErrorOfTheAnnouncedSizeIsAMatterOfStatus) {
 }
 
 TEST_F(LargeTicket, AnEmptyAssetThatWasAnnouncedEmptyIsRefused) {
-    deliver(assetRecord(service().url("/${f}"), 0), {});
+    serveAsset(assetRecord(service().url("/${f}"), 0), {});
     EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(), "Could not validate ticket for " + bundle,
                                                 stapleFailed(65))));
 }
 
 TEST_F(LargeTicket, OfTheRightSizeMustStillBeGenuine) {
     for (const Data& other : {ticketForOthers(), Data(genuine.size())}) {
-        deliver(other);
+        serveAsset(other);
         EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(), "Could not validate ticket for " + bundle,
                                                     stapleFailed(65))));
     }
@@ -197,7 +177,7 @@ TEST_F(LargeTicket, OfTheRightSizeMustStillBeGenuine) {
 }
 
 TEST_F(LargeTicket, ThatIsRevokedIsSaidSo) {
-    deliver(revokedTicket());
+    serveAsset(revokedTicket());
     EXPECT_THAT(
         staple(),
         Ended(77, ElementsAre(
@@ -211,7 +191,7 @@ TEST_F(LargeTicket, MayComeFromAnotherHostWithACertificateOfItsOwn) {
     HostileServer assets(identityOf(ServerChain("localhost").issue()));
     assets.setHandler(
         [this](const RecordedRequest&) { return Response{.body = foundation::toString(genuine)}; });
-    deliver(assetRecord(assets.url("/${f}", "localhost"), genuine.size()), {.status = 404});
+    serveAsset(assetRecord(assets.url("/${f}", "localhost"), genuine.size()), {.status = 404});
     EXPECT_THAT(
         pinwell({"staple", "-v", bundle}),
         Ended(0, AllOf(Contains("Domain is 127.0.0.1"), Contains("Domain is localhost"), Contains(kWorked))));
@@ -230,8 +210,8 @@ TEST_F(LargeTicket, MayBeRedirected) {
 
 TEST_F(LargeTicket, AHostThatIsNotTrustedParksTheRun) {
     HostileServer stranger(identityOf(ServerChain("localhost").issue()));
-    deliver(assetRecord(stranger.url("/${f}"), genuine.size()),
-            {});  // by its address, which it has no name for
+    serveAsset(assetRecord(stranger.url("/${f}"), genuine.size()),
+               {});  // by its address, which it has no name for
     expectParked(DownloadFailed());
     EXPECT_THAT(stranger.requests(), IsEmpty());
 }
@@ -242,7 +222,7 @@ TEST_F(LargeTicket, AHostThatDoesNotAnswerParksTheRun) {
         const HostileServer gone(identityOf(serverChain));
         nobody = gone.url("/${f}");
     }
-    deliver(assetRecord(nobody, genuine.size()), {});
+    serveAsset(assetRecord(nobody, genuine.size()), {});
     expectParked(DownloadFailed("could not be made"));
 }
 
@@ -256,7 +236,7 @@ TEST_F(LargeTicket, AConnectionThatIsCutParksTheRun) {
 
 TEST_F(LargeTicket, AnAssetThatIsNotServedOverHTTPSParksTheRun) {
     for (const char* url : {"http://127.0.0.1:1/${f}", "file:///etc/hostname", "ftp://127.0.0.1/${f}"}) {
-        deliver(assetRecord(url, genuine.size()), {});
+        serveAsset(assetRecord(url, genuine.size()), {});
         expectParked(DownloadFailed());
     }
 }
@@ -270,13 +250,13 @@ TEST_F(LargeTicket, AnAssetBeyondMeasureParksTheRun) {
 
 TEST_F(LargeTicket, ATemporaryDirectoryThatIsNotThereParksTheRun) {
     environment["TMPDIR"] = directory / "nowhere";
-    deliver(genuine);
+    serveAsset(genuine);
     expectParked(DownloadFailed());
 }
 
 TEST_F(LargeTicket, AParkedRunIsSilentInQuietMode) {
     HostileServer stranger(identityOf(ServerChain("localhost").issue()));
-    deliver(assetRecord(stranger.url("/${f}"), genuine.size()), {});
+    serveAsset(assetRecord(stranger.url("/${f}"), genuine.size()), {});
     RunningProcess run(command({"staple", "-q", bundle}));
     ASSERT_TRUE(stranger.waitForEndedConnections(1));
     EXPECT_TRUE(run.isRunning());
