@@ -14,7 +14,7 @@
 #include "lumora-local/commands.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/pinwell_artefact_hasher.h"
-#include "lumora-local/sample_bundle.h"
+#include "lumora-local/samples.h"
 #include "lumora-local/serve_command.h"
 #include "lumora-local/service_directory.h"
 
@@ -99,7 +99,7 @@ void runList(const Arguments& arguments) {
 }
 
 void runSample(const Arguments& arguments) {
-    for (const std::string& path : writeSamples(arguments.directory)) {
+    for (const std::string& path : writeSamples(arguments.directory, foundation::Date::now())) {
         writeText(foundation::format("%@\n", path));
     }
 }
@@ -168,7 +168,7 @@ void declareCommands(CLI::App& app, Arguments& arguments) {
     list->add_flag("--json", arguments.asJson, "As one JSON document");
     addEnvironment(list, arguments);
 
-    add("sample", "Write sample artefacts to try the service with", "Where to write them", runSample);
+    add("sample", "Write a sample of each kind of artefact", "Where to write them", runSample);
 
     CLI::App* serve =
         add("serve", "Answer lookups over HTTPS until SIGTERM or SIGINT", "The service", runServe);

@@ -1,16 +1,10 @@
 #include "lumora-local/sample_bundle.h"
 
-#include <algorithm>
-#include <array>
-#include <filesystem>
-#include <system_error>
-
 #include "foundation/byte_writer.h"
 #include "foundation/format.h"
-#include "foundation/property_list.h"
-#include "lumora-local/failure.h"
+#include "lumora-local/ad_hoc_signature.h"
 #include "lumora-local/file_writing.h"
-#include "lumora-local/sha256.h"
+#include "lumora-local/property_list_document.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -19,7 +13,6 @@ using foundation::ByteView;
 using foundation::ByteWriter;
 using foundation::Data;
 using foundation::Dictionary;
-using foundation::format;
 
 constexpr std::string_view kName = "Sample";
 constexpr std::string_view kIdentifier = "example.lumora.sample";
@@ -44,23 +37,6 @@ constexpr unsigned kAlignmentBits = 14;
 constexpr std::uint32_t kAlignment = 1U << kAlignmentBits;
 constexpr std::uint64_t kLoadAddress = 0x100000000;
 
-// Signature.
-constexpr std::uint32_t kSuperBlobMagic = 0xFADE0CC0;
-constexpr std::uint32_t kCodeDirectoryMagic = 0xFADE0C02;
-constexpr std::uint32_t kRequirementsMagic = 0xFADE0C01;
-constexpr std::uint32_t kCmsMagic = 0xFADE0B01;
-constexpr std::uint32_t kCmsSlot = 0x10000;
-constexpr std::uint32_t kCodeDirectoryVersion = 0x20400;
-constexpr std::uint32_t kCodeDirectoryHeaderSize = 88;
-constexpr std::uint32_t kAdHoc = 2;
-constexpr std::uint64_t kMainBinary = 1;
-constexpr std::uint8_t kDigestSize = 32;
-constexpr std::uint8_t kDigestTypeSha256 = 2;
-constexpr unsigned kPageBits = 12;
-constexpr std::size_t kPageSize = std::size_t{1} << kPageBits;
-constexpr std::uint32_t kSpecialSlots = 3;
-constexpr std::uint32_t kCodeSlots = kAlignment / kPageSize;
-
 /// "return 0" for each processor.
 Data program(std::uint32_t cpuType) {
     ByteWriter code;
@@ -70,80 +46,6 @@ Data program(std::uint32_t cpuType) {
         code.be16(0x31C0).u8(0xC3);  // xor eax, eax; ret
     }
     return std::move(code).take();
-}
-
-Data requirementsBlob() {
-    ByteWriter blob;
-    blob.be32(kRequirementsMagic).be32(12).be32(0);
-    return std::move(blob).take();
-}
-
-Data cmsBlob() {
-    ByteWriter blob;
-    blob.be32(kCmsMagic).be32(8);
-    return std::move(blob).take();
-}
-
-std::uint32_t codeDirectorySize(const std::string& identifier) {
-    return kCodeDirectoryHeaderSize + static_cast<std::uint32_t>(identifier.size()) + 1 +
-           kDigestSize * (kSpecialSlots + kCodeSlots);
-}
-
-Data codeDirectory(const std::string& identifier, ByteView code, const SealedComponents& components) {
-    const auto hashOffset = static_cast<std::uint32_t>(kCodeDirectoryHeaderSize + identifier.size() + 1 +
-                                                       kDigestSize * kSpecialSlots);
-    ByteWriter directory;
-    directory.be32(kCodeDirectoryMagic)
-        .be32(codeDirectorySize(identifier))
-        .be32(kCodeDirectoryVersion)
-        .be32(kAdHoc)
-        .be32(hashOffset)
-        .be32(kCodeDirectoryHeaderSize)  // identifier offset
-        .be32(kSpecialSlots)
-        .be32(kCodeSlots)
-        .be32(static_cast<std::uint32_t>(code.size()))  // limit
-        .u8(kDigestSize)
-        .u8(kDigestTypeSha256)
-        .u8(0)  // platform
-        .u8(kPageBits)
-        .be32(0)  // spare
-        .be32(0)  // scatter offset
-        .be32(0)  // team offset
-        .be32(0)  // spare
-        .be64(0)  // limit as 64 bits: unused
-        .be64(0)  // executable segment: offset, length, flags
-        .be64(code.size())
-        .be64(kMainBinary)
-        .text(identifier)
-        .u8(0)
-        .bytes(sha256(components.resourceSeal))              // slot 3
-        .bytes(sha256(requirementsBlob()))                   // slot 2
-        .bytes(sha256(components.informationPropertyList));  // slot 1
-    for (; !code.empty(); code = code.subspan(std::min(kPageSize, code.size()))) {
-        directory.bytes(sha256(code.first(std::min(kPageSize, code.size()))));
-    }
-    return std::move(directory).take();
-}
-
-std::uint32_t superBlobSize(const std::string& identifier) {
-    return 12 + 3 * 8 + codeDirectorySize(identifier) + 12 + 8;
-}
-
-Data superBlob(const std::string& identifier, ByteView code, const SealedComponents& components) {
-    const std::array<std::pair<std::uint32_t, Data>, 3> blobs{{
-        {0, codeDirectory(identifier, code, components)},
-        {2, requirementsBlob()},
-        {kCmsSlot, cmsBlob()},
-    }};
-    ByteWriter super;
-    super.be32(kSuperBlobMagic).be32(superBlobSize(identifier)).be32(blobs.size());
-    std::size_t offset = 12 + 8 * blobs.size();
-    for (const auto& [slot, blob] : blobs) {
-        super.be32(slot).be32(static_cast<std::uint32_t>(offset));
-        offset += blob.size();
-    }
-    for (const auto& [slot, blob] : blobs) super.bytes(blob);
-    return std::move(super).take();
 }
 
 void appendName(ByteWriter& writer, std::string_view name) {
@@ -199,47 +101,22 @@ Data textSegment(std::uint32_t cpuType, std::uint32_t signatureSize) {
     return std::move(image).take();
 }
 
-Data propertyList(const Dictionary& dictionary) {
-    foundation::Result<Data> document = foundation::serializePropertyList(dictionary);
-    if (!document) throw Failure(EX_SOFTWARE, document.error().localizedDescription());
-    return *std::move(document);
-}
-
-std::string writeSampleApplication(const std::string& directory) {
-    const std::string name(kName);
-    const SealedComponents components{
-        .informationPropertyList = propertyList({{"CFBundleExecutable", name},
-                                                 {"CFBundleIdentifier", kIdentifier},
-                                                 {"CFBundleName", name},
-                                                 {"CFBundlePackageType", "APPL"},
-                                                 {"CFBundleVersion", "1"}}),
-        .resourceSeal = propertyList({{"files", Dictionary{}}, {"files2", Dictionary{}}})};
-    const std::string identifier(kIdentifier);
-    const Data executable = makeUniversalImage({
-        {kCpuTypeX86_64, makeSignedImage(kCpuTypeX86_64, identifier, components)},
-        {kCpuTypeArm64, makeSignedImage(kCpuTypeArm64, identifier, components)},
-    });
-
-    const std::string path = directory + "/" + name + ".app";
-    PendingDirectory pending(path, 0755);
-    const std::string contents = pending.path() + "/Contents";
-    makeDirectory(contents, 0755);
-    makeDirectory(contents + "/Programs", 0755);
-    makeDirectory(contents + "/_CodeSignature", 0755);
-    writeNewFile(contents + "/Info.plist", components.informationPropertyList, 0644);
-    writeNewFile(contents + "/Programs/" + name, executable, 0755);
-    writeNewFile(contents + "/_CodeSignature/CodeResources", components.resourceSeal, 0644);
-    pending.publish();
-    return path;
-}
-
 }  // namespace
 
 Data makeSignedImage(std::uint32_t cpuType, const std::string& identifier,
                      const SealedComponents& components) {
-    Data image = textSegment(cpuType, superBlobSize(identifier));
-    const Data signature = superBlob(identifier, image, components);
-    foundation::append(image, signature);
+    const auto signatureOf = [&](ByteView code) {
+        return AdHocSignature{
+            .identifier = identifier,
+            .code = code,
+            .components = {{1, components.informationPropertyList}, {3, components.resourceSeal}},
+            .isMainProgram = true};
+    };
+    // The load command gives the signature's length, and its digests cover the load command.
+    const Data placeholder(kAlignment);
+    const std::size_t size = signatureOf(placeholder).superblob().size();
+    Data image = textSegment(cpuType, static_cast<std::uint32_t>(size));
+    foundation::append(image, signatureOf(image).superblob());
     return image;
 }
 
@@ -261,11 +138,32 @@ Data makeUniversalImage(const std::vector<std::pair<std::uint32_t, Data>>& slice
     return std::move(header).take();
 }
 
-std::vector<std::string> writeSamples(const std::string& directory) {
-    std::error_code error;
-    std::filesystem::create_directories(directory, error);
-    if (error) throw Failure(EX_CANTCREAT, format("cannot create %@: %@", directory, error.message()));
-    return {writeSampleApplication(directory)};
+std::string writeSampleApplication(const std::string& directory) {
+    const std::string name(kName);
+    const SealedComponents components{
+        .informationPropertyList = propertyListDocument({{"CFBundleExecutable", name},
+                                                         {"CFBundleIdentifier", kIdentifier},
+                                                         {"CFBundleName", name},
+                                                         {"CFBundlePackageType", "APPL"},
+                                                         {"CFBundleVersion", "1"}}),
+        .resourceSeal = propertyListDocument({{"files", Dictionary{}}, {"files2", Dictionary{}}})};
+    const std::string identifier(kIdentifier);
+    const Data executable = makeUniversalImage({
+        {kCpuTypeX86_64, makeSignedImage(kCpuTypeX86_64, identifier, components)},
+        {kCpuTypeArm64, makeSignedImage(kCpuTypeArm64, identifier, components)},
+    });
+
+    std::string path = directory + "/" + name + ".app";
+    PendingDirectory pending(path, 0755);
+    const std::string contents = pending.path() + "/Contents";
+    makeDirectory(contents, 0755);
+    makeDirectory(contents + "/Programs", 0755);
+    makeDirectory(contents + "/_CodeSignature", 0755);
+    writeNewFile(contents + "/Info.plist", components.informationPropertyList, 0644);
+    writeNewFile(contents + "/Programs/" + name, executable, 0755);
+    writeNewFile(contents + "/_CodeSignature/CodeResources", components.resourceSeal, 0644);
+    pending.publish();
+    return path;
 }
 
 }  // namespace pinwell::lumora

@@ -4,8 +4,7 @@
 //   Sample.app/Contents/Programs/Sample               the executable; any one directory in Contents would do
 //   Sample.app/Contents/_CodeSignature/CodeResources  the seal of its resources, of which there are none
 //
-// The executable is a universal image of two slices. Each is signed ad hoc: a superblob with a SHA-256 code
-// directory (version 0x20400, with page hashes), an empty requirements blob and an empty CMS blob.
+// The executable is a universal image of two slices, each signed ad hoc (ad_hoc_signature.h).
 #pragma once
 
 #include <cstdint>
@@ -33,8 +32,7 @@ foundation::Data makeSignedImage(std::uint32_t cpuType, const std::string& ident
 /// Slices behind a universal header (magic CAFEBABE), each at a multiple of 16 KiB.
 foundation::Data makeUniversalImage(const std::vector<std::pair<std::uint32_t, foundation::Data>>& slices);
 
-/// Writes the samples into `directory`, which is made when it does not exist, and answers their paths.
-/// Nothing that exists is overwritten. Throws Failure.
-std::vector<std::string> writeSamples(const std::string& directory);
+/// Writes `directory`/Sample.app and answers its path. Nothing that exists is overwritten. Throws Failure.
+std::string writeSampleApplication(const std::string& directory);
 
 }  // namespace pinwell::lumora

@@ -2,7 +2,7 @@
 #include <csignal>
 #include <filesystem>
 
-#include "fixture.h"
+#include "local_service.h"
 
 namespace pinwell::test {
 namespace {
@@ -16,38 +16,10 @@ using testing::StartsWith;
 constexpr const char* kStapled = "The staple and validate action worked!";
 constexpr const char* kValidated = "The validate action worked!";
 
-class LocalService : public EndToEndTest {
+class LocalService : public LocalServiceTest {
   protected:
-    LocalService() {
-        const ProcessResult sample = lumora({"sample", directory / "samples"});
-        const ProcessResult init = lumora({"init", serviceDirectory, "--host", "127.0.0.1"});
-        if (sample.exitStatus != 0 || init.exitStatus != 0)
-            throw std::runtime_error(sample.errors + init.errors);
-        bundle = linesOf(sample.output).at(0);
-        environment["PINWELL_PLATFORM"] = serviceDirectory + "/platform";
-    }
+    LocalService() { bundle = samples.at(0); }
 
-    ProcessResult lumora(std::vector<std::string> arguments) const {
-        return runProcess(lumoraCommand(std::move(arguments)));
-    }
-    Command lumoraCommand(std::vector<std::string> arguments) const {
-        Command command = this->command(std::move(arguments));
-        command.executable = LUMORA_LOCAL_PROGRAM;
-        return command;
-    }
-    /// A command on the service's records that must work.
-    void record(const std::string& verb, std::vector<std::string> arguments) const {
-        arguments.insert(arguments.begin(), {verb, serviceDirectory});
-        const ProcessResult result = lumora(std::move(arguments));
-        ASSERT_EQ(result.exitStatus, 0) << result.errors;
-    }
-    /// Starts it on a free port and points the platform directory at it.
-    void serveRecords() {
-        serving = std::make_unique<RunningProcess>(
-            lumoraCommand({"serve", serviceDirectory, "--listen", "127.0.0.1:0", "--update-platform"}));
-        const auto ready = serving->waitForLine("ready at https://127.0.0.1:");
-        if (!ready) throw std::runtime_error("lumora-local did not start: " + serving->resultSoFar().errors);
-    }
     ProcessResult stapleAt(const std::string& path) const { return pinwell({"staple", path}); }
 
     testing::Matcher<const ProcessResult&> Stapled() const {
@@ -70,9 +42,6 @@ class LocalService : public EndToEndTest {
                                      StartsWith("Could not find base64 encoded ticket in response for 2/"),
                                      stapleFailed(65)));
     }
-
-    const std::string serviceDirectory = directory / "service";
-    std::unique_ptr<RunningProcess> serving;
 };
 
 TEST_F(LocalService, FromASampleToItsRevocation) {

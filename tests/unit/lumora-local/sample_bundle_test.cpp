@@ -143,22 +143,21 @@ TEST(UniversalImage, ListsItsSlicesAtAlignedPlaces) {
     }
 }
 
-TEST(Sample, IsABundleWithAnExecutable) {
+TEST(SampleApplication, IsABundleWithAnExecutable) {
     const TemporaryDirectory directory;
-    const auto paths = writeSamples(directory / "new/samples");
-    ASSERT_EQ(paths, std::vector<std::string>{directory / "new/samples/Sample.app"});
-    const auto executable = foundation::mainExecutableOfBundle(paths[0]);
+    const std::string path = writeSampleApplication(directory.path());
+    ASSERT_EQ(path, directory / "Sample.app");
+    const auto executable = foundation::mainExecutableOfBundle(path);
     ASSERT_TRUE(executable);
     struct stat status {};
     ASSERT_EQ(::stat(executable->c_str(), &status), 0);
     EXPECT_NE(status.st_mode & 0111U, 0U);
-    EXPECT_TRUE(
-        foundation::parsePropertyList(foundation::toData(readFile(paths[0] + "/Contents/Info.plist"))));
+    EXPECT_TRUE(foundation::parsePropertyList(foundation::toData(readFile(path + "/Contents/Info.plist"))));
 }
 
-TEST(Sample, IsSignedOverItsOwnPropertyList) {
+TEST(SampleApplication, IsSignedOverItsOwnPropertyList) {
     const TemporaryDirectory directory;
-    const std::string contents = writeSamples(directory.path())[0] + "/Contents";
+    const std::string contents = writeSampleApplication(directory.path()) + "/Contents";
     const Data universal = foundation::toData(readFile(contents + "/Programs/Sample"));
     ByteReader reader(universal);
     reader.seek(8 + 8, "first slice");
@@ -172,15 +171,15 @@ TEST(Sample, IsSignedOverItsOwnPropertyList) {
     EXPECT_EQ(reading(codeDirectory, 32), sha256(foundation::toData(readFile(contents + "/Info.plist"))));
 }
 
-TEST(Sample, OverwritesNothing) {
+TEST(SampleApplication, OverwritesNothing) {
     const TemporaryDirectory directory;
     writeFile(directory / "Sample.app/Contents/mine", "mine");
-    EXPECT_THROW(writeSamples(directory.path()), Failure);
+    EXPECT_THROW(writeSampleApplication(directory.path()), Failure);
     EXPECT_EQ(readFile(directory / "Sample.app/Contents/mine"), "mine");
     EXPECT_FALSE(std::filesystem::exists(directory / "Sample.app/Contents/Info.plist"));
 }
 
-TEST(Sample, IsTheSameEveryTime) {
+TEST(SampleApplication, IsTheSameEveryTime) {
     EXPECT_EQ(makeSignedImage(kCpuTypeArm64, "a", kComponents),
               makeSignedImage(kCpuTypeArm64, "a", kComponents));
 }

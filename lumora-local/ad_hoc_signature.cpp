@@ -1,0 +1,111 @@
+#include "lumora-local/ad_hoc_signature.h"
+
+#include <algorithm>
+#include <array>
+#include <utility>
+
+#include "foundation/byte_writer.h"
+#include "lumora-local/sha256.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::ByteView;
+using foundation::ByteWriter;
+using foundation::Data;
+
+constexpr std::uint32_t kSuperBlobMagic = 0xFADE0CC0;
+constexpr std::uint32_t kCodeDirectoryMagic = 0xFADE0C02;
+constexpr std::uint32_t kRequirementsMagic = 0xFADE0C01;
+constexpr std::uint32_t kCmsMagic = 0xFADE0B01;
+constexpr std::uint32_t kCodeDirectorySlot = 0;
+constexpr std::uint32_t kRequirementsSlot = 2;
+constexpr std::uint32_t kCmsSlot = 0x10000;
+constexpr std::uint32_t kCodeDirectoryVersion = 0x20400;
+constexpr std::size_t kCodeDirectoryHeaderSize = 88;
+constexpr std::uint32_t kAdHoc = 2;
+constexpr std::uint64_t kMainBinary = 1;
+constexpr std::uint8_t kDigestSize = 32;
+constexpr std::uint8_t kDigestTypeSha256 = 2;
+constexpr unsigned kPageBits = 12;
+constexpr std::size_t kPageSize = std::size_t{1} << kPageBits;
+
+std::uint32_t narrow(std::size_t size) {
+    return static_cast<std::uint32_t>(size);
+}
+
+Data requirementsBlob() {
+    return ByteWriter().be32(kRequirementsMagic).be32(12).be32(0).data();
+}
+
+Data cmsBlob() {
+    return ByteWriter().be32(kCmsMagic).be32(8).data();
+}
+
+}  // namespace
+
+Data AdHocSignature::codeDirectory() const {
+    std::map<std::uint32_t, Data> covered = components;
+    covered[kRequirementsSlot] = requirementsBlob();
+    const std::uint32_t specialSlots = covered.rbegin()->first;
+    const std::size_t codeSlots = (code.size() + kPageSize - 1) / kPageSize;
+    const std::size_t hashOffset =
+        kCodeDirectoryHeaderSize + identifier.size() + 1 + std::size_t{kDigestSize} * specialSlots;
+
+    ByteWriter directory;
+    directory.be32(kCodeDirectoryMagic)
+        .be32(narrow(hashOffset + kDigestSize * codeSlots))
+        .be32(kCodeDirectoryVersion)
+        .be32(kAdHoc)
+        .be32(narrow(hashOffset))
+        .be32(kCodeDirectoryHeaderSize)  // identifier offset
+        .be32(specialSlots)
+        .be32(narrow(codeSlots))
+        .be32(narrow(code.size()))  // limit
+        .u8(kDigestSize)
+        .u8(kDigestTypeSha256)
+        .u8(0)  // platform
+        .u8(kPageBits)
+        .be32(0)  // spare
+        .be32(0)  // scatter offset
+        .be32(0)  // team offset
+        .be32(0)  // spare
+        .be64(0)  // limit as 64 bits: unused
+        .be64(0)  // executable segment: offset, length, flags
+        .be64(isMainProgram ? code.size() : 0)
+        .be64(isMainProgram ? kMainBinary : 0)
+        .text(identifier)
+        .u8(0);
+    for (std::uint32_t slot = specialSlots; slot > 0; --slot) {
+        const auto component = covered.find(slot);
+        directory.bytes(component == covered.end() ? Data(kDigestSize) : sha256(component->second));
+    }
+    for (ByteView rest = code; !rest.empty(); rest = rest.subspan(std::min(kPageSize, rest.size()))) {
+        directory.bytes(sha256(rest.first(std::min(kPageSize, rest.size()))));
+    }
+    return std::move(directory).take();
+}
+
+Data AdHocSignature::superblob() const {
+    const std::array<std::pair<std::uint32_t, Data>, 3> blobs{{
+        {kCodeDirectorySlot, codeDirectory()},
+        {kRequirementsSlot, requirementsBlob()},
+        {kCmsSlot, cmsBlob()},
+    }};
+    ByteWriter index;
+    ByteWriter contents;
+    const std::size_t start = 12 + 8 * blobs.size();
+    for (const auto& [slot, blob] : blobs) {
+        index.be32(slot).be32(narrow(start + contents.size()));
+        contents.bytes(blob);
+    }
+    return ByteWriter()
+        .be32(kSuperBlobMagic)
+        .be32(narrow(start + contents.size()))
+        .be32(narrow(blobs.size()))
+        .bytes(index.data())
+        .bytes(contents.data())
+        .data();
+}
+
+}  // namespace pinwell::lumora

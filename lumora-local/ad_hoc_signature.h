@@ -1,0 +1,35 @@
+// Ad-hoc code signatures, for the samples.
+//
+// A superblob of three blobs: a SHA-256 code directory (version 0x20400, one hash per page of 4096 bytes), an
+// empty requirements blob, an empty CMS blob.
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <string>
+
+#include "foundation/bytes.h"
+
+namespace pinwell::lumora {
+
+struct AdHocSignature {
+    std::string identifier;
+
+    /// What the page hashes cover: the file from its start to the signature. Borrowed.
+    foundation::ByteView code;
+
+    /// What the special slots cover, by slot number from 1. The requirements, slot 2, are added; slots that
+    /// are not named are left zero.
+    std::map<std::uint32_t, foundation::Data> components{};
+
+    /// The code is a program's own image, and not data.
+    bool isMainProgram = false;
+
+    /// Its length depends on the identifier, the length of the code and the highest slot alone.
+    foundation::Data superblob() const;
+
+  private:
+    foundation::Data codeDirectory() const;
+};
+
+}  // namespace pinwell::lumora

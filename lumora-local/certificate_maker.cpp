@@ -1,0 +1,113 @@
+#include "lumora-local/certificate_maker.h"
+
+#include <openssl/asn1.h>
+#include <openssl/bn.h>
+#include <openssl/ec.h>
+#include <openssl/rsa.h>
+
+#include <ctime>
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::Date;
+
+constexpr std::int64_t kDay = 24 * 60 * 60;
+constexpr std::int64_t kValidity = 3653 * kDay;
+
+// RFC 5280, 4.1.2.2: at most 20 octets and positive, so 159 random bits.
+constexpr int kSerialNumberBits = 159;
+
+// The markers count by their presence alone; their value is an ASN.1 NULL.
+constexpr std::array<unsigned char, 2> kMarkerValue{0x05, 0x00};
+
+using BigNumberHandle = std::unique_ptr<BIGNUM, OpenSSLDeleter<BN_free>>;
+using ObjectHandle = std::unique_ptr<ASN1_OBJECT, OpenSSLDeleter<ASN1_OBJECT_free>>;
+using OctetStringHandle = std::unique_ptr<ASN1_OCTET_STRING, OpenSSLDeleter<ASN1_OCTET_STRING_free>>;
+
+void setSerialNumber(X509* certificate) {
+    const BigNumberHandle number(BN_new());
+    require(number != nullptr &&
+                BN_rand(number.get(), kSerialNumberBits, BN_RAND_TOP_ANY, BN_RAND_BOTTOM_ANY) == 1 &&
+                BN_add_word(number.get(), 1) == 1 &&
+                BN_to_ASN1_INTEGER(number.get(), X509_get_serialNumber(certificate)) != nullptr,
+            "choose a serial number");
+}
+
+void setSubject(X509* certificate, const std::string& commonName) {
+    X509_NAME* subject = X509_get_subject_name(certificate);
+    const auto add = [&](const char* field, std::string_view text) {
+        const foundation::ByteView bytes = foundation::asBytes(text);
+        require(X509_NAME_add_entry_by_txt(subject, field, MBSTRING_UTF8, octets(bytes),
+                                           static_cast<int>(bytes.size()), -1, 0) == 1,
+                "set a certificate's subject");
+    };
+    add("O", "Lumora Local");
+    add("CN", commonName);
+}
+
+void setValidity(X509* certificate, Date now) {
+    const auto at = [](std::int64_t seconds) { return static_cast<std::time_t>(seconds); };
+    require(ASN1_TIME_set(X509_getm_notBefore(certificate), at(now.seconds - kDay)) != nullptr &&
+                ASN1_TIME_set(X509_getm_notAfter(certificate), at(now.seconds + kValidity)) != nullptr,
+            "set a certificate's validity");
+}
+
+void addExtension(X509* certificate, X509* issuer, int identifier, const std::string& value) {
+    X509V3_CTX context;
+    X509V3_set_ctx_nodb(&context);
+    X509V3_set_ctx(&context, issuer, certificate, nullptr, nullptr, 0);
+    const ExtensionHandle extension(X509V3_EXT_conf_nid(nullptr, &context, identifier, value.c_str()));
+    require(extension != nullptr && X509_add_ext(certificate, extension.get(), -1) == 1,
+            "add a certificate extension");
+}
+
+void addMarker(X509* certificate, std::string_view oid) {
+    const ObjectHandle object(OBJ_txt2obj(std::string(oid).c_str(), 1));
+    const OctetStringHandle value(ASN1_OCTET_STRING_new());
+    require(object != nullptr && value != nullptr &&
+                ASN1_OCTET_STRING_set(value.get(), kMarkerValue.data(), kMarkerValue.size()) == 1,
+            "make a certificate marker");
+    const ExtensionHandle extension(X509_EXTENSION_create_by_OBJ(nullptr, object.get(), 0, value.get()));
+    require(extension != nullptr && X509_add_ext(certificate, extension.get(), -1) == 1,
+            "add a certificate marker");
+}
+
+KeyHandle makeKey(KeyKind kind) {
+    return KeyHandle(kind == KeyKind::rsa2048 ? EVP_RSA_gen(2048) : EVP_EC_gen("P-256"));
+}
+
+}  // namespace
+
+IssuedCertificate issueCertificate(const CertificateProfile& profile, const IssuedCertificate* issuer,
+                                   Date now) {
+    IssuedCertificate made{CertificateHandle(X509_new()), makeKey(profile.keyKind)};
+    require(made.certificate != nullptr && made.key != nullptr, "make a key");
+    X509* certificate = made.certificate.get();
+    const IssuedCertificate& parent = issuer != nullptr ? *issuer : made;
+
+    require(X509_set_version(certificate, X509_VERSION_3) == 1 &&
+                X509_set_pubkey(certificate, made.key.get()) == 1,
+            "make a certificate");
+    setSerialNumber(certificate);
+    setSubject(certificate, profile.commonName);
+    setValidity(certificate, now);
+    require(X509_set_issuer_name(certificate, X509_get_subject_name(parent.certificate.get())) == 1,
+            "set a certificate's issuer");
+
+    const auto add = [&](int identifier, const std::string& value) {
+        if (!value.empty()) addExtension(certificate, parent.certificate.get(), identifier, value);
+    };
+    add(NID_basic_constraints, profile.basicConstraints);
+    add(NID_key_usage, profile.keyUsage);
+    add(NID_ext_key_usage, profile.extendedKeyUsage);
+    add(NID_subject_key_identifier, "hash");  // before the authority's, which for the root is taken from it
+    add(NID_authority_key_identifier, "keyid:always");
+    add(NID_subject_alt_name, profile.subjectAlternativeName);
+    if (!profile.markerOid.empty()) addMarker(certificate, profile.markerOid);
+
+    require(X509_sign(certificate, parent.key.get(), EVP_sha256()) > 0, "sign a certificate");
+    return made;
+}
+
+}  // namespace pinwell::lumora

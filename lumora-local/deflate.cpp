@@ -1,0 +1,33 @@
+#include "lumora-local/deflate.h"
+
+#include <zlib.h>
+
+#include "lumora-local/failure.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::ByteView;
+using foundation::Data;
+
+const Bytef* octets(ByteView bytes) {
+    return reinterpret_cast<const Bytef*>(bytes.data());
+}
+
+}  // namespace
+
+Data deflated(ByteView contents) {
+    uLongf length = compressBound(contents.size());
+    Data stream(length);
+    const int status = compress2(reinterpret_cast<Bytef*>(stream.data()), &length, octets(contents),
+                                 contents.size(), Z_BEST_COMPRESSION);
+    if (status != Z_OK) throw Failure(EX_SOFTWARE, "cannot compress");
+    stream.resize(length);
+    return stream;
+}
+
+std::uint32_t crc32(ByteView bytes) {
+    return static_cast<std::uint32_t>(::crc32_z(0, octets(bytes), bytes.size()));
+}
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,22 @@
+// The sample artefacts, one of every kind that carries a ticket.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "foundation/date.h"
+
+namespace pinwell::lumora {
+
+/// Writes these into `directory`, which is made when it does not exist, and answers their paths in this
+/// order:
+///
+///   Sample.app     an application (sample_bundle.h)
+///   Sample.dmg     a disk image with a code signature (sample_disk_image.h)
+///   Unsigned.dmg   the same image without one
+///   Sample.pkg     a signed flat package (sample_package.h), signed at `now`
+///
+/// Nothing that exists is overwritten, and when one of them exists none is written. Throws Failure.
+std::vector<std::string> writeSamples(const std::string& directory, foundation::Date now);
+
+}  // namespace pinwell::lumora

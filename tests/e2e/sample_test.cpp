@@ -1,0 +1,156 @@
+// The samples: what they are to the tool, and what they are to other readers of their formats, before and
+// after a ticket is stapled to them.
+#include <filesystem>
+
+#include "local_service.h"
+#include "support/file_properties.h"
+
+namespace pinwell::test {
+namespace {
+
+using testing::AllOf;
+using testing::Contains;
+using testing::ElementsAre;
+using testing::HasSubstr;
+using testing::StartsWith;
+
+class Sample : public LocalServiceTest {
+  protected:
+    /// What another program, found in the search path, says of something; it must be content.
+    ProcessResult tool(const std::string& name, std::vector<std::string> arguments) const {
+        arguments.insert(arguments.begin(), name);
+        const ProcessResult result = runProcess({.executable = "/usr/bin/env",
+                                                 .arguments = std::move(arguments),
+                                                 .environment = {{"PATH", "/usr/bin:/bin"}, {"LC_ALL", "C"}},
+                                                 .workingDirectory = directory.path()});
+        EXPECT_EQ(result.exitStatus, 0) << name << ": " << result.output << result.errors;
+        return result;
+    }
+
+    void stapleWithATicketOfItsOwn(const std::string& path) {
+        record("issue", {path});
+        if (serving == nullptr) serveRecords();
+        const std::string processing = "Processing: " + path;
+        ASSERT_THAT(pinwell({"staple", path}),
+                    Ended(0, ElementsAre(processing, processing, "The staple and validate action worked!")));
+    }
+
+    const std::string& signedImage() const { return samples.at(1); }
+    const std::string& unsignedImage() const { return samples.at(2); }
+    const std::string& package() const { return samples.at(3); }
+};
+
+TEST_F(Sample, IsThereForEveryKindOfArtefact) {
+    const std::string in = directory / "samples/";
+    EXPECT_THAT(samples,
+                ElementsAre(in + "Sample.app", in + "Sample.dmg", in + "Unsigned.dmg", in + "Sample.pkg"));
+}
+
+TEST_F(Sample, GoesFromNoTicketToARevokedOne) {
+    record("issue", samples);
+    serveRecords();
+    for (const std::string& path : samples) {
+        const std::string name = std::filesystem::path(path).filename();
+        const std::string processing = "Processing: " + path;
+        EXPECT_THAT(pinwell({"validate", path}),
+                    Ended(65, ElementsAre(processing, name + " does not have a ticket stapled to it.")));
+        EXPECT_THAT(pinwell({"staple", path}),
+                    Ended(0, ElementsAre(processing, processing, "The staple and validate action worked!")));
+        EXPECT_THAT(pinwell({"validate", path}),
+                    Ended(0, ElementsAre(processing, "The validate action worked!")));
+        record("revoke", {path});
+        EXPECT_THAT(pinwell({"validate", path}),
+                    Ended(77, ElementsAre(processing, "Could not validate ticket for " + path,
+                                          "The ticket for " + name +
+                                              " has been revoked. Tollmark will prevent it from running.")));
+    }
+}
+
+TEST_F(Sample, IsStapledAgainWithATicketThatIsDeliveredAsAnAsset) {
+    for (const std::string& path : samples) {
+        stapleWithATicketOfItsOwn(path);
+        const std::string processing = "Processing: " + path;
+        record("issue", {path, "--asset"});
+        EXPECT_THAT(pinwell({"staple", "-v", path}),
+                    Ended(0, Contains(StartsWith("URL of large ticket asset: https://127.0.0.1:"))));
+        EXPECT_THAT(pinwell({"validate", path}),
+                    Ended(0, ElementsAre(processing, "The validate action worked!")));
+    }
+}
+
+TEST_F(Sample, OfAnImageIsReadByOthersBeforeAndAfter) {
+    for (const std::string& path : {signedImage(), unsignedImage()}) {
+        const std::string before = readFile(path);
+        const std::size_t dataEnd = before.find("</plist>");  // what a code signature would follow
+        ASSERT_NE(dataEnd, std::string::npos);
+        EXPECT_THAT(tool("7z", {"t", path}).output, HasSubstr("Everything is Ok"));
+        tool("dmg2img", {path, "before.img"});
+
+        stapleWithATicketOfItsOwn(path);
+        const std::string after = readFile(path);
+        EXPECT_GT(after.size(), before.size());
+        EXPECT_EQ(after.substr(0, dataEnd), before.substr(0, dataEnd));
+        EXPECT_THAT(tool("7z", {"l", path}).output, HasSubstr("README.TXT"));
+        EXPECT_THAT(tool("7z", {"t", path}).output, HasSubstr("Everything is Ok"));
+        tool("dmg2img", {path, "after.img"});
+        EXPECT_EQ(readFile(directory / "after.img"), readFile(directory / "before.img"));
+        EXPECT_EQ(readFile(directory / "after.img").size(), 256U * 512U);
+    }
+}
+
+TEST_F(Sample, OfAPackageIsReadByOthersBeforeAndAfter) {
+    const std::string before = readFile(package());
+    tool("7z", {"t", package()});
+    tool("bsdtar", {"-tf", package()});
+
+    stapleWithATicketOfItsOwn(package());
+    const std::string after = readFile(package());
+    EXPECT_GT(after.size(), before.size());
+    EXPECT_EQ(after.substr(0, before.size()), before);
+    EXPECT_THAT(tool("7z", {"l", package()}).output,
+                AllOf(HasSubstr("PackageInfo"), HasSubstr("ReadMe.txt")));
+    tool("7z", {"t", package()});
+    EXPECT_THAT(linesOf(tool("bsdtar", {"-tf", package()}).output), ElementsAre("PackageInfo", "ReadMe.txt"));
+    std::filesystem::create_directory(directory / "with-7z");
+    std::filesystem::create_directory(directory / "with-bsdtar");
+    tool("7z", {"x", "-owith-7z", package()});
+    tool("bsdtar", {"-x", "-C", "with-bsdtar", "-f", package()});
+    for (const char* const name : {"PackageInfo", "ReadMe.txt"})
+        EXPECT_EQ(readFile(directory / ("with-7z/" + std::string(name))),
+                  readFile(directory / ("with-bsdtar/" + std::string(name))));
+    EXPECT_EQ(readFile(directory / "with-7z/ReadMe.txt"),
+              "A sample package, to try a record service with.\n");
+}
+
+TEST_F(Sample, OfAPackageCarriesASignatureThatVerifies) {
+    // The checksum opens the heap, the signature stands behind it, both where the table of contents says.
+    const std::string contents = readFile(package());
+    const auto at = [&](std::size_t offset) {
+        return std::to_integer<unsigned>(std::byte(contents[offset]));
+    };
+    std::size_t heap = 28;
+    for (std::size_t i = 8, length = 0; i < 16; ++i) {
+        length = length << 8U | at(i);
+        if (i == 15) heap += length;
+    }
+    tool("7z", {"x", package(), "[TOC].xml"});
+    const std::string table = readFile(directory / "[TOC].xml");
+    const std::string opening = R"(<signature style="CMS"><offset>20</offset><size>)";
+    const std::size_t found = table.find(opening);
+    ASSERT_NE(found, std::string::npos) << table;
+    const std::size_t size = std::stoul(table.substr(found + opening.size()));
+    writeFile(directory / "checksum", contents.substr(heap, 20));
+    writeFile(directory / "signature", contents.substr(heap + 20, size));
+    tool("openssl", {"cms", "-verify", "-inform", "DER", "-in", "signature", "-content", "checksum",
+                     "-binary", "-noverify", "-out", "/dev/null"});
+    writeFile(directory / "checksum", std::string(20, 'x'));
+    EXPECT_NE(runProcess({.executable = "/usr/bin/openssl",
+                          .arguments = {"cms", "-verify", "-inform", "DER", "-in", "signature", "-content",
+                                        "checksum", "-binary", "-noverify", "-out", "/dev/null"},
+                          .workingDirectory = directory.path()})
+                  .exitStatus,
+              0);
+}
+
+}  // namespace
+}  // namespace pinwell::test
