@@ -1,9 +1,9 @@
 #include "codesign/adhoc_signer.h"
 
-#include <algorithm>
 #include <limits>
 
 #include "codesign/code_directory.h"
+#include "codesign/read_ahead.h"
 #include "codesign/superblob.h"
 #include "foundation/byte_writer.h"
 
@@ -13,7 +13,6 @@ using foundation::ByteWriter;
 
 namespace {
 
-constexpr std::size_t kPieceSize = 256 * 1024;
 constexpr std::uint32_t kRequirementsMagic = 0xFADE0C01;
 constexpr std::uint32_t kNoLimit32 = 0xFFFFFFFF;
 
@@ -27,12 +26,8 @@ Data emptyRequirements() {
 
 Data digestOfContent(const ByteSource& source, std::uint64_t limit) {
     Hasher hasher(DigestType::sha256);
-    source.expectSequentialReads();
-    for (std::uint64_t offset = 0; offset < limit;) {
-        const auto length = static_cast<std::size_t>(std::min<std::uint64_t>(kPieceSize, limit - offset));
-        hasher.update(source.read(offset, length));
-        offset += length;
-    }
+    ReadAhead content(source, limit);
+    for (ByteView piece = content.next(); !piece.empty(); piece = content.next()) hasher.update(piece);
     return hasher.finish();
 }
 

@@ -28,10 +28,23 @@ Status statusForOpen(int number) {
 }  // namespace
 
 Data ByteSource::read(std::uint64_t offset, std::size_t length) const {
-    if (offset > size() || length > size() - offset) refuse("a range reaches past the end of the file");
+    checkRange(offset, length);
     Data bytes(length);
-    if (readAt(offset, bytes) != length) throw CodeError(kIOError, "the file became shorter");
+    readAll(offset, bytes);
     return bytes;
+}
+
+void ByteSource::read(std::uint64_t offset, std::span<std::byte> buffer) const {
+    checkRange(offset, buffer.size());
+    readAll(offset, buffer);
+}
+
+void ByteSource::checkRange(std::uint64_t offset, std::size_t length) const {
+    if (offset > size() || length > size() - offset) refuse("a range reaches past the end of the file");
+}
+
+void ByteSource::readAll(std::uint64_t offset, std::span<std::byte> buffer) const {
+    if (readAt(offset, buffer) != buffer.size()) throw CodeError(kIOError, "the file became shorter");
 }
 
 FileSource::FileSource(const std::string& path)

@@ -3,6 +3,7 @@
 
 #include <cstdint>
 #include <memory>
+#include <span>
 #include <string>
 
 #include "foundation/bytes.h"
@@ -26,12 +27,19 @@ class ByteSource {
     /// first.
     Data read(std::uint64_t offset, std::size_t length) const;
 
+    /// The same into a buffer of the caller's, all of which is filled.
+    void read(std::uint64_t offset, std::span<std::byte> buffer) const;
+
     /// A hint that all of it is about to be read, from the first byte to the last.
     virtual void expectSequentialReads() const {}
 
   protected:
     /// Fills as much of `buffer` as there are bytes at `offset` and answers how much that was.
     virtual std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const = 0;
+
+  private:
+    void checkRange(std::uint64_t offset, std::size_t length) const;
+    void readAll(std::uint64_t offset, std::span<std::byte> buffer) const;
 };
 
 /// A regular file, held open: a path that is replaced later does not matter any more.

@@ -138,8 +138,8 @@ class AdHocSigning : public CodeSigningTest {
 
 TEST_F(AdHocSigning, OfAFileHasTheHashOfItsCodeDirectory) {
     // More than one piece of reading.
-    const Data contents(600'001, std::byte{0x42});
-    const Data hash = codeHashOf(2, expectedForFile(600'001, codeDigest(2, contents)));
+    const Data contents(1'600'001, std::byte{0x42});
+    const Data hash = codeHashOf(2, expectedForFile(1'600'001, codeDigest(2, contents)));
     const codesign::SigningInformation information = sign(contents);
     EXPECT_EQ(information.cdHashes, std::vector<Data>{hash});
     EXPECT_EQ(information.digestAlgorithms, std::vector<std::uint32_t>{2});
