@@ -1,10 +1,14 @@
-// Times two commands against each other in one run: compare_commands RUNS LIMIT COMMAND... -- PEER...
+// Times two commands against each other in one run:
+//   compare_commands [--memory MEBIBYTES] RUNS LIMIT COMMAND... -- PEER...
 //
 // The two are run by turns, so that whatever else the machine does weighs on both alike. Prints the median
-// wall time of each and their ratio. Exits with 1 when the ratio is above LIMIT, 0 otherwise, and with 70
-// when a command could not be run or ended otherwise than its first run did.
+// wall time of each, their ratio, the fastest run of each, which says more on a busy machine, and the most
+// memory that a run of each had. Exits with 1 when the ratio of the medians is above LIMIT ("inf" for none)
+// or COMMAND had more memory than MEBIBYTES, 0 otherwise, and with 70 when a command could not be run or
+// ended otherwise than its first run did.
 #include <fcntl.h>
 #include <spawn.h>
+#include <sys/resource.h>
 #include <sys/wait.h>
 
 #include <algorithm>
@@ -13,6 +17,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <limits>
 #include <string_view>
 #include <vector>
 
@@ -23,10 +28,11 @@ namespace {
 using Clock = std::chrono::steady_clock;
 using Milliseconds = std::chrono::duration<double, std::milli>;
 
-constexpr int kWarmUps = 3;
+constexpr int kMostWarmUps = 3;
 constexpr int kExitSlower = 1;
 constexpr int kExitUsage = 64;
 constexpr int kExitSoftware = 70;
+constexpr double kKibibytesInAMebibyte = 1024;
 
 class Contender {
   public:
@@ -44,18 +50,22 @@ class Contender {
         posix_spawn_file_actions_destroy(&actions);
         if (failure != 0) giveUp(std::strerror(failure));
         int status = 0;
-        while (waitpid(process, &status, 0) < 0 && errno == EINTR) {
+        rusage usage{};
+        while (wait4(process, &status, 0, &usage) < 0 && errno == EINTR) {
         }
         const Milliseconds took = Clock::now() - start;
         if (firstStatus_ < 0) firstStatus_ = status;
         if (status != firstStatus_) giveUp("ended otherwise than before");
         if (counts) times_.push_back(took.count());
+        kibibytes_ = std::max(kibibytes_, usage.ru_maxrss);
     }
 
     double median() {
         std::sort(times_.begin(), times_.end());
         return times_[times_.size() / 2];
     }
+    double fastest() const { return *std::min_element(times_.begin(), times_.end()); }
+    double mebibytes() const { return static_cast<double>(kibibytes_) / kKibibytesInAMebibyte; }
 
   private:
     [[noreturn]] void giveUp(const char* why) const {
@@ -66,16 +76,24 @@ class Contender {
     char** arguments_;
     int firstStatus_ = -1;
     std::vector<double> times_;
+    long kibibytes_ = 0;
 };
 
 }  // namespace
 
 int main(int argc, char** argv) {
+    double memoryLimit = std::numeric_limits<double>::infinity();
+    if (argc > 2 && std::string_view(argv[1]) == "--memory") {
+        memoryLimit = std::strtod(argv[2], nullptr);
+        argv += 2;
+        argc -= 2;
+    }
     char** separator =
         std::find_if(argv, argv + argc, [](const char* word) { return std::string_view(word) == "--"; });
     const auto words = separator - argv;
     if (words < 4 || words + 1 >= argc) {
-        std::fprintf(stderr, "usage: compare_commands RUNS LIMIT COMMAND... -- PEER...\n");
+        std::fprintf(stderr,
+                     "usage: compare_commands [--memory MEBIBYTES] RUNS LIMIT COMMAND... -- PEER...\n");
         return kExitUsage;
     }
     const int runs = std::max(1, std::atoi(argv[1]));
@@ -84,12 +102,14 @@ int main(int argc, char** argv) {
 
     Contender ours(argv + 3);
     Contender peer(separator + 1);
-    for (int i = -kWarmUps; i < runs; ++i) {
+    for (int i = -std::min(runs, kMostWarmUps); i < runs; ++i) {
         ours.run(i >= 0);
         peer.run(i >= 0);
     }
     const double ratio = ours.median() / peer.median();
-    std::printf("%.2f ms against %.2f ms: ratio %.2f (limit %.2f)\n", ours.median(), peer.median(), ratio,
-                limit);
-    return ratio > limit ? kExitSlower : 0;
+    std::printf(
+        "%.2f ms against %.2f ms: ratio %.2f (limit %.2f); fastest %.2f and %.2f ms; %.1f and %.1f MiB\n",
+        ours.median(), peer.median(), ratio, limit, ours.fastest(), peer.fastest(), ours.mebibytes(),
+        peer.mebibytes());
+    return ratio > limit || ours.mebibytes() > memoryLimit ? kExitSlower : 0;
 }
