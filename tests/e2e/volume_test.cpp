@@ -14,6 +14,8 @@
 #include <cctype>
 #include <cerrno>
 #include <cstring>
+#include <new>
+#include <stdexcept>
 #include <system_error>
 
 #include "artefacts.h"
@@ -43,19 +45,19 @@ struct Place {
 
 Place placeOf(const std::string& path, std::uint64_t offset) {
     const foundation::FileDescriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));
-    alignas(fiemap) std::array<std::byte, sizeof(fiemap) + sizeof(fiemap_extent)> answer{};
-    fiemap question{};
-    question.fm_start = offset;
-    question.fm_length = 1;
-    question.fm_flags = FIEMAP_FLAG_SYNC;
-    question.fm_extent_count = 1;
-    std::memcpy(answer.data(), &question, sizeof question);
-    if (ioctl(file.get(), FS_IOC_FIEMAP, answer.data()) != 0)
+    alignas(fiemap) std::array<std::byte, sizeof(fiemap) + sizeof(fiemap_extent)> room{};
+    fiemap& map = *new (room.data()) fiemap;
+    map.fm_start = offset;
+    map.fm_length = 1;
+    map.fm_flags = FIEMAP_FLAG_SYNC;
+    map.fm_mapped_extents = 0;
+    map.fm_extent_count = 1;
+    map.fm_reserved = 0;
+    if (ioctl(file.get(), FS_IOC_FIEMAP, &map) != 0)
         throw std::system_error(errno, std::generic_category(), path);
+    if (map.fm_mapped_extents != 1) throw std::runtime_error(path + " has a hole");
     fiemap_extent extent{};
-    std::memcpy(&question, answer.data(), sizeof question);
-    if (question.fm_mapped_extents != 1) throw std::runtime_error(path + " has a hole");
-    std::memcpy(&extent, answer.data() + sizeof question, sizeof extent);
+    std::memcpy(&extent, room.data() + sizeof(fiemap), sizeof extent);
     return {extent.fe_physical + (offset - extent.fe_logical), (extent.fe_flags & FIEMAP_EXTENT_SHARED) != 0};
 }
 
