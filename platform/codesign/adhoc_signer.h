@@ -1,19 +1,20 @@
 // Ad-hoc signing of a whole file as opaque data. The code directory (layout in code_directory.h) is settled
 // byte for byte, so that every host gives one file the same cdhash:
 //
-// | Offset      | Value                                                                                     |
-// |-------------|-------------------------------------------------------------------------------------------|
-// | 8           | version 0x20100; 0x20300 when the limit does not fit in 32 bits                           |
-// | 12          | flags 2                                                                                   |
-// | 24          | special slots: 6 for a disk image, 2 otherwise                                            |
-// | 28          | code slots: 1                                                                             |
-// | 32          | the limit; FFFFFFFF in the 0x20300 form, which has it in 64 bits at 56                    |
-// | 36          | digest size 32, digest type 2, platform 0, page size 0                                    |
-// | 40          | zeros up to the header's end, the 64-bit limit apart                                      |
-// | header size | the identifier and a zero byte                                                            |
-// | then        | digests of the special slots 6 (the trailer), 5, 4, 3 (zero) for a disk image only | | then
-// | digests of the special slots 2 (the empty requirements) and 1 (zero)                      | | then |
-// SHA-256 of the file's bytes from 0 to the limit                                           |
+// | Offset      | Value                                                                     |
+// |-------------|---------------------------------------------------------------------------|
+// | 8           | version 0x20100; 0x20300 when the limit does not fit in 32 bits           |
+// | 12          | flags 2                                                                   |
+// | 24          | special slots: 6 for a disk image, 2 otherwise                            |
+// | 28          | code slots: 1                                                             |
+// | 32          | the limit; FFFFFFFF in the 0x20300 form, which has it in 64 bits at 56    |
+// | 36          | digest size 32, digest type 2, platform 0, page size 0                    |
+// | 40          | zeros up to the header's end, the 64-bit limit apart                      |
+// | header size | the identifier and a zero byte                                            |
+// | then        | of a disk image only: digests of the special slots 6 (the trailer) and 5, |
+// |             | 4, 3 (zero)                                                               |
+// | then        | digests of the special slots 2 (the empty requirements) and 1 (zero)      |
+// | then        | SHA-256 of the file's bytes from 0 to the limit                           |
 //
 // The limit is the file's size; of a disk image, where its signature begins or its trailer
 // (disk_image_trailer.h).
