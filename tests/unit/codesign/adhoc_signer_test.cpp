@@ -4,9 +4,9 @@
 
 #include <span>
 
-#include "disk_image_sample.h"
 #include "foundation/byte_writer.h"
 #include "service_fixture.h"
+#include "support/disk_image_builder.h"
 
 namespace pinwell::test {
 namespace {
@@ -150,34 +150,34 @@ TEST_F(AdHocSigning, OfAFileHasTheHashOfItsCodeDirectory) {
 
 TEST_F(AdHocSigning, OfADiskImageCoversWhatStandsBeforeItsTrailer) {
     const Data content(1000, std::byte{0x42});
-    const Data codeDirectory =
-        layOutOpaqueCodeDirectory({"ADHOC", 1000, codeDigest(2, trailerWith(0, 0)), codeDigest(2, content)});
-    EXPECT_EQ(sign(diskImage(content, {})).unique, codeHashOf(2, codeDirectory));
+    const Data codeDirectory = layOutOpaqueCodeDirectory(
+        {"ADHOC", 1000, codeDigest(2, DiskImageBuilder().trailer()), codeDigest(2, content)});
+    EXPECT_EQ(sign(DiskImageBuilder().data(content).build()).unique, codeHashOf(2, codeDirectory));
 }
 
 TEST_F(AdHocSigning, IsTheSameBeforeAndAfterATicketIsStapled) {
     const Data content(1000, std::byte{0x42});
     const Data stapled = SuperBlobBuilder().blob(0x10002, makeBlob(0xFADE0B01, Data(300))).build();
     const Data longer = SuperBlobBuilder().blob(0x10002, makeBlob(0xFADE0B01, Data(900))).build();
-    const auto unsignedHash = sign(diskImage(content, {})).unique;
-    EXPECT_EQ(sign(diskImage(content, stapled)).unique, unsignedHash);
-    EXPECT_EQ(sign(diskImage(content, longer)).unique, unsignedHash);
+    const auto unsignedHash = sign(DiskImageBuilder().data(content).build()).unique;
+    EXPECT_EQ(sign(DiskImageBuilder().data(content).superblob(stapled).build()).unique, unsignedHash);
+    EXPECT_EQ(sign(DiskImageBuilder().data(content).superblob(longer).build()).unique, unsignedHash);
 }
 
 TEST_F(AdHocSigning, CoversASignatureAreaThatDoesNotEndAtTheTrailer) {
     const Data content(1000, std::byte{0x42});
-    const Data trailer = trailerWith(900, 99);
+    const Data trailer = DiskImageBuilder().codeSignOffset(900).codeSignLength(99).trailer();
     Data file = content;
     foundation::append(file, trailer);
-    const Data codeDirectory =
-        layOutOpaqueCodeDirectory({"ADHOC", 1000, codeDigest(2, trailerWith(0, 0)), codeDigest(2, content)});
+    const Data codeDirectory = layOutOpaqueCodeDirectory(
+        {"ADHOC", 1000, codeDigest(2, DiskImageBuilder().trailer()), codeDigest(2, content)});
     EXPECT_EQ(sign(file).unique, codeHashOf(2, codeDirectory));
 }
 
 TEST_F(AdHocSigning, OfATrailerAloneCoversNoBytes) {
-    const Data codeDirectory =
-        layOutOpaqueCodeDirectory({"ADHOC", 0, codeDigest(2, trailerWith(0, 0)), codeDigest(2, {})});
-    EXPECT_EQ(sign(diskImage({}, {})).unique, codeHashOf(2, codeDirectory));
+    const Data codeDirectory = layOutOpaqueCodeDirectory(
+        {"ADHOC", 0, codeDigest(2, DiskImageBuilder().trailer()), codeDigest(2, {})});
+    EXPECT_EQ(sign(DiskImageBuilder().data({}).build()).unique, codeHashOf(2, codeDirectory));
 }
 
 TEST_F(AdHocSigning, TakesAnExecutableImageAsOpaqueData) {
@@ -187,7 +187,8 @@ TEST_F(AdHocSigning, TakesAnExecutableImageAsOpaqueData) {
 }
 
 TEST_F(AdHocSigning, GivesOtherBytesAnotherHash) {
-    EXPECT_NE(sign(diskImage(Data(1000), {})).unique, sign(diskImage(Data(1001), {})).unique);
+    EXPECT_NE(sign(DiskImageBuilder().data(Data(1000)).build()).unique,
+              sign(DiskImageBuilder().data(Data(1001)).build()).unique);
 }
 
 TEST_F(AdHocSigning, NeedsItsParameters) {

@@ -1,8 +1,8 @@
 #include <filesystem>
 
 #include "codesign/nested_code.h"
-#include "disk_image_sample.h"
 #include "service_fixture.h"
+#include "support/disk_image_builder.h"
 
 namespace pinwell::test {
 namespace {
@@ -65,7 +65,8 @@ TEST_F(AllCodeHashes, AreThoseOfAllDirectoriesOfAllSignedSlices) {
 }
 
 TEST_F(AllCodeHashes, AreThoseOfASignedDiskImage) {
-    writeFile(scratch / "image", diskImage(Data(100), SuperBlobBuilder::adHoc().build()));
+    writeFile(scratch / "image",
+              DiskImageBuilder().data(Data(100)).superblob(SuperBlobBuilder::adHoc()).build());
     EXPECT_EQ(identifiersAt(scratch / "image"), Identifiers{"com.example.sample"});
 }
 

@@ -1,7 +1,7 @@
 // What makes a signature valid, asked of the service with whole files.
-#include "disk_image_sample.h"
 #include "service_fixture.h"
 #include "support/cms_signer.h"
+#include "support/disk_image_builder.h"
 
 namespace pinwell::test {
 namespace {
@@ -213,42 +213,46 @@ TEST_F(StaticValidity, RefusesAMalformedCmsBlob) {
 
 class DiskImageValidity : public StaticValidity {
   protected:
-    static Data signatureCovering(const Data& trailer) {
-        return SuperBlobBuilder::adHoc(CodeDirectoryBuilder().covers(6, trailer).build()).build();
+    // Of an image whose signature demands this trailer.
+    codesign::Status validityCovering(const DiskImageBuilder& trailer) {
+        const Data directory = CodeDirectoryBuilder().covers(6, trailer.trailer()).build();
+        return askAbout(DiskImageBuilder().superblob(SuperBlobBuilder::adHoc(directory)).build()).validity;
     }
 };
 
 TEST_F(DiskImageValidity, CoversTheTrailerWithoutItsSignatureFields) {
-    EXPECT_EQ(askAbout(diskImage(Data(100), signatureCovering(trailerWith(0, 0)))).validity, kSuccess);
-    EXPECT_EQ(askAbout(diskImage(Data(100), signatureCovering(trailerWith(0, 1)))).validity,
-              kInvalidSignature);
+    EXPECT_EQ(validityCovering(DiskImageBuilder()), kSuccess);
+    EXPECT_EQ(validityCovering(DiskImageBuilder().codeSignLength(1)), kInvalidSignature);
 }
 
 TEST_F(DiskImageValidity, MayLeaveTheTrailerUncovered) {
-    EXPECT_EQ(askAbout(diskImage(Data(100), SuperBlobBuilder::adHoc().build())).validity, kSuccess);
+    EXPECT_EQ(
+        askAbout(DiskImageBuilder().data(Data(100)).superblob(SuperBlobBuilder::adHoc()).build()).validity,
+        kSuccess);
 }
 
 TEST_F(DiskImageValidity, WinsOverWhatTheFileBeginsWith) {
     const Data image = ExecutableImageBuilder().build();
     const Data codeDirectory = CodeDirectoryBuilder().identifier("com.example.disk").build();
     const Data superblob = SuperBlobBuilder::adHoc(codeDirectory).build();
-    EXPECT_EQ(askAbout(diskImage(image, superblob)).information.identifier, "com.example.disk");
-    EXPECT_EQ(askAbout(diskImage(image, {})).validity, kUnsigned);
+    EXPECT_EQ(askAbout(DiskImageBuilder().data(image).superblob(superblob).build()).information.identifier,
+              "com.example.disk");
+    EXPECT_EQ(askAbout(DiskImageBuilder().data(image).build()).validity, kUnsigned);
 }
 
 TEST_F(DiskImageValidity, IsUnsignedWithOneZeroField) {
     Data file(100);
-    foundation::append(file, trailerWith(50, 0));
+    foundation::append(file, DiskImageBuilder().codeSignOffset(50).codeSignLength(0).trailer());
     EXPECT_EQ(askAbout(file).validity, kUnsigned);
     file.resize(100);
-    foundation::append(file, trailerWith(0, 50));
+    foundation::append(file, DiskImageBuilder().codeSignOffset(0).codeSignLength(50).trailer());
     EXPECT_EQ(askAbout(file).validity, kUnsigned);
 }
 
 TEST_F(DiskImageValidity, RefusesASignatureThatReachesIntoTheTrailer) {
     const auto validity = [this](std::uint64_t offset, std::uint64_t length) {
         Data file(100);
-        foundation::append(file, trailerWith(offset, length));
+        foundation::append(file, DiskImageBuilder().codeSignOffset(offset).codeSignLength(length).trailer());
         return askAbout(file).validity;
     };
     EXPECT_EQ(validity(50, 51), kInvalidSignature);
@@ -257,7 +261,7 @@ TEST_F(DiskImageValidity, RefusesASignatureThatReachesIntoTheTrailer) {
 }
 
 TEST_F(DiskImageValidity, NeedsATrailerOfItsVersion) {
-    Data file = diskImage(Data(100), SuperBlobBuilder::adHoc().build());
+    Data file = DiskImageBuilder().data(Data(100)).superblob(SuperBlobBuilder::adHoc()).build();
     file[file.size() - 512 + 7] = std::byte{3};
     EXPECT_EQ(askAbout(file).validity, kUnsigned);
 }
