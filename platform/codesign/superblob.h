@@ -13,7 +13,7 @@
 // length in the area set aside for it is padding and is never looked at.
 //
 // Refused: a wrong magic, a length or count that does not fit, two entries for one slot, blobs that overlap
-// each other or the index, and whatever exceeds the limits below.
+// each other or the index, and whatever exceeds the limits in code_signing.h.
 #pragma once
 
 #include <cstdint>
@@ -21,6 +21,7 @@
 #include <vector>
 
 #include "codesign/byte_source.h"
+#include "codesign/code_signing.h"
 
 namespace pinwell::codesign {
 
@@ -31,13 +32,6 @@ inline constexpr std::uint32_t kWrapperMagic = 0xFADE0B01;
 
 inline constexpr std::size_t kSuperBlobHeaderSize = 12;
 inline constexpr std::size_t kBlobHeaderSize = 8;
-
-/// Longest superblob that is read: an image's page hashes grow with it (32 bytes for 4 KiB), so this is room
-/// for some 8 GiB of code.
-inline constexpr std::uint32_t kMaximumSuperBlobLength = 64 * 1024 * 1024;
-
-/// Largest number of index entries; a signature has about ten.
-inline constexpr std::uint32_t kMaximumBlobCount = 1024;
 
 /// Slots of the index.
 inline constexpr std::uint32_t kSlotCodeDirectory = 0;

@@ -99,7 +99,7 @@ bool PWHashedDiskImage::readSignature(files::FileHandle& file) {
             end, trailerStart);
         return false;
     }
-    if (csLength_ > kMaximumSuperblobLength) return false;
+    if (csLength_ > codesign::kMaximumSuperBlobLength) return false;
     attempt(
         [&] {
             file.seek(csStart_);

@@ -5,6 +5,7 @@
 #include <set>
 #include <utility>
 
+#include "codesign/code_signing.h"
 #include "foundation/byte_reader.h"
 #include "foundation/byte_writer.h"
 #include "src/messages.h"
@@ -86,7 +87,7 @@ ByteView dataOf(const BlobRecord& record) {
 }
 
 std::optional<BlobSet> orderedBlobSetForSuperBlob(ByteView superblob, std::uint32_t numberOfBlobs) {
-    if (numberOfBlobs > kMaximumBlobCount) return std::nullopt;
+    if (numberOfBlobs > codesign::kMaximumBlobCount) return std::nullopt;
     const std::vector<IndexEntry> index = readIndex(superblob, numberOfBlobs);
     if (index.size() < numberOfBlobs) {
         NoisyLog("Did not find %d unique blobs in the code signing data.", numberOfBlobs);

@@ -11,7 +11,9 @@
 //
 // Stricter than what the code-signing service reads, since the parts are to be written back: the blobs follow
 // the index at once, in index order, back to back, and the last one ends where the superblob ends. Refused
-// besides: two equal index entries, and whatever exceeds the limits below. No blob is looked into.
+// besides: two equal index entries, and whatever exceeds the limits of the code-signing service
+// (codesign/code_signing.h): a length is a claim of the file, with nothing behind it where the file is
+// sparse, and a record takes fifty times what the smallest blob does. No blob is looked into.
 #pragma once
 
 #include <cstdint>
@@ -30,15 +32,6 @@ inline constexpr std::uint32_t kBlobHeaderSize = 8;
 /// The slot that a stapled ticket stands in, and the magic of its blob.
 inline constexpr std::uint32_t kTicketSlotType = 0x10002;
 inline constexpr std::uint32_t kTicketBlobMagic = 0xFADE0B01;
-
-/// Longest superblob that is read, room for the longest signature that the code-signing service reads and the
-/// longest file that a ticket can come from (64 MiB each). A length is a claim of the file, and where the
-/// file is sparse nothing stands behind it.
-inline constexpr std::uint64_t kMaximumSuperblobLength = 128ULL * 1024 * 1024;
-
-/// Most blobs that are told apart; a signature has about ten, and a record takes fifty times what the
-/// smallest blob does.
-inline constexpr std::uint32_t kMaximumBlobCount = 65'536;
 
 /// Keys of a blob record.
 inline constexpr std::string_view kSlotTypeKey = "cs slot type";  // number, 32 bits

@@ -8,6 +8,7 @@
 #include "disk_image_fixture.h"
 #include "foundation/byte_writer.h"
 #include "foundation/process.h"
+#include "src/cdhash_extract.h"
 
 namespace pinwell {
 namespace {
@@ -109,6 +110,24 @@ TEST_F(DiskImage, WithASuperblobThatCountsNoBlobsIsSignedAndAccepted) {
     EXPECT_EQ(image.appropriateExitCode(), 0);
     EXPECT_TRUE(image.blobs().empty());
     EXPECT_EQ(image.syntheticCDHash(), std::nullopt);
+}
+
+// Without a set of blobs there are none, which is what the superblob counts.
+TEST_F(DiskImage, WhoseSuperblobCountsNoBlobsButIsLongerIsAccepted) {
+    const std::uint64_t length = 20;
+    Data superblob = SuperBlobBuilder().length(length).build();
+    superblob.resize(length);
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(superblob), 0),
+              (Lines{codesignLine(1000, length), "Stored Codesign length: 20 number of blobs: 0",
+                     "Length of all blobs (12) did not match length of code signing data (20)."}));
+    EXPECT_TRUE(open().blobs().empty());
+}
+
+TEST_F(DiskImage, WhoseSuperblobIsMagicAndLengthAloneIsAccepted) {
+    const Data superblob = foundation::ByteWriter().be32(0xFADE0CC0).be32(8).data();
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(superblob), 0),
+              (Lines{codesignLine(1000, 8), "Stored Codesign length: 8 number of blobs: 0",
+                     "Length of all blobs (12) did not match length of code signing data (8)."}));
 }
 
 TEST_F(DiskImage, ThatCannotBeOpenedEndsWith66) {
@@ -297,11 +316,14 @@ TEST_F(DiskImage, WhoseLastBlobHasNoRoomForItsHeaderIsRefusedThoughAllIsFilled) 
               "Total Length: 20 Found blobs: 0");
 }
 
-// A file that is a hole but for its trailer: it has as many bytes as its trailer likes.
+// A file that is a hole behind its data and in front of its trailer: it has as many bytes as its trailer
+// likes.
 class SparseDiskImage : public DiskImage {
   protected:
-    void putSparse(std::uint64_t signatureLength) {
-        test::writeFile(path, foundation::ByteView(Data(1000, std::byte{0xDA})));
+    void putSparse(std::uint64_t signatureLength, const Data& startOfSignature = {}) {
+        Data start(1000, std::byte{0xDA});
+        foundation::append(start, startOfSignature);
+        test::writeFile(path, foundation::ByteView(start));
         std::filesystem::resize_file(path, 1000 + signatureLength);
         const Data trailer =
             DiskImageBuilder().codeSignOffset(1000).codeSignLength(signatureLength).trailer();
@@ -318,15 +340,53 @@ TEST_F(SparseDiskImage, WithAGiantSuperblobIsRefusedInSilenceAndUnread) {
 }
 
 TEST_F(SparseDiskImage, WithASuperblobJustOverTheLimitIsRefusedInSilenceAndUnread) {
-    putSparse(kMaximumSuperblobLength + 1);
-    EXPECT_EQ(linesOfReading(66), Lines{codesignLine(1000, kMaximumSuperblobLength + 1)});
+    putSparse(codesign::kMaximumSuperBlobLength + 1);
+    EXPECT_EQ(linesOfReading(66), Lines{codesignLine(1000, codesign::kMaximumSuperBlobLength + 1)});
     EXPECT_EQ(platform.files.count("handle.read"), 1U);
 }
 
 TEST_F(SparseDiskImage, WithASuperblobAtTheLimitIsRead) {
-    putSparse(kMaximumSuperblobLength);
-    EXPECT_EQ(linesOfReading(66), (Lines{codesignLine(1000, kMaximumSuperblobLength),
+    putSparse(codesign::kMaximumSuperBlobLength);
+    EXPECT_EQ(linesOfReading(66), (Lines{codesignLine(1000, codesign::kMaximumSuperBlobLength),
                                          "Not a supported code signature block, 0"}));
+}
+
+// What is an image's signature to the one is its signature to the other, up to the last byte and the last
+// blob.
+class DiskImageAtTheLimits : public SparseDiskImage {
+  protected:
+    std::optional<Data> hashOfTheSignature() {
+        const auto basic = basicCodeProperties(url, platform.servicesWith(*service));
+        const foundation::Value properties(basic);
+        const Data* hash = properties["cdhash"].data();
+        return hash == nullptr ? std::nullopt : std::optional(*hash);
+    }
+    static Data signersHash() { return test::codeHashOf(2, DiskImageBuilder::codeDirectory()); }
+
+    std::unique_ptr<codesign::CodeSigningService> service = codesign::makeCodeSigningService();
+};
+
+TEST_F(DiskImageAtTheLimits, OfASuperblobsLengthAgreesWithTheCodeSigningService) {
+    for (const std::uint32_t excess : {0U, 1U}) {
+        // A ticket, of zeros, makes up for what is missing to the length.
+        const std::uint32_t length = codesign::kMaximumSuperBlobLength + excess;
+        const auto others = static_cast<std::uint32_t>(DiskImageBuilder::signature().build().size());
+        const Data header = foundation::ByteWriter().be32(0xFADE0B01).be32(length - others - 8).data();
+        putSparse(length, DiskImageBuilder::signature().blob(0x10002, header).length(length).build());
+        EXPECT_EQ(open().appropriateExitCode(), excess == 0 ? 0 : 66);
+        EXPECT_EQ(hashOfTheSignature(), excess == 0 ? std::optional(signersHash()) : std::nullopt);
+    }
+}
+
+TEST_F(DiskImageAtTheLimits, OfTheNumberOfBlobsAgreesWithTheCodeSigningService) {
+    for (const std::uint32_t excess : {0U, 1U}) {
+        SuperBlobBuilder builder = DiskImageBuilder::signature();
+        for (std::uint32_t i = 3; i < codesign::kMaximumBlobCount + excess; ++i)
+            builder.blob(0x20000 + i, makeBlob(0xFADE7171, {}));
+        put(DiskImageBuilder().superblob(builder));
+        EXPECT_EQ(open().appropriateExitCode(), excess == 0 ? 0 : 66);
+        EXPECT_EQ(hashOfTheSignature(), excess == 0 ? std::optional(signersHash()) : std::nullopt);
+    }
 }
 
 TEST_F(DiskImage, IsNeverReadInFrontOfItsSignature) {

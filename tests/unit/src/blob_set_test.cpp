@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include "codesign/code_signing.h"
 #include "foundation/byte_writer.h"
 #include "src/messages.h"
 #include "support/disk_image_builder.h"
@@ -149,11 +150,14 @@ SuperBlobBuilder blobsOfHeadersAlone(std::uint32_t count) {
 }
 
 TEST(BlobSet, HasAsManyBlobsAsTheLimitAndNoMore) {
-    const auto [most, lines] = read(blobsOfHeadersAlone(kMaximumBlobCount).build(), kMaximumBlobCount);
+    const auto [most, lines] =
+        read(blobsOfHeadersAlone(codesign::kMaximumBlobCount).build(), codesign::kMaximumBlobCount);
     ASSERT_TRUE(most.has_value());
-    EXPECT_EQ(most->size(), kMaximumBlobCount);
-    EXPECT_EQ(read(blobsOfHeadersAlone(kMaximumBlobCount + 1).build(), kMaximumBlobCount + 1).blobs,
-              std::nullopt);
+    EXPECT_EQ(most->size(), codesign::kMaximumBlobCount);
+    EXPECT_EQ(
+        read(blobsOfHeadersAlone(codesign::kMaximumBlobCount + 1).build(), codesign::kMaximumBlobCount + 1)
+            .blobs,
+        std::nullopt);
 }
 
 class SuperblobWithTicket : public testing::Test {
