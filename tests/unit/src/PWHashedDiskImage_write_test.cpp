@@ -443,5 +443,31 @@ TEST_F(CodeSignedDiskImage, KeepsItsSignaturesHashAndValidityThroughEveryStaple)
     EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(DiskImageBuilder::signature())));
 }
 
+// Two entries for one slot make a signature invalid, whatever the slot; so such an image is known by a
+// synthetic hash, until a staple leaves it one ticket.
+TEST_F(CodeSignedDiskImage, WithTwoTicketsHasNoValidSignatureUntilAStapleDropsThem) {
+    put(DiskImageBuilder());
+    const auto syntheticHash = reopen()->cdHash();
+    put(DiskImageBuilder().superblob(signedAndStapled("ONE").blob(0x10002, ticketBlob("TWO"))));
+    const auto image = reopen();
+    EXPECT_EQ(image->appropriateExitCode(), 0);
+    EXPECT_EQ(image->ticketData(), foundation::toData("TWO"));
+    ASSERT_TRUE(syntheticHash.has_value());
+    EXPECT_EQ(image->cdHash(), syntheticHash);
+    EXPECT_EQ(image->digestAlgorithm(), 2U);
+
+    EXPECT_EQ(staple("NEW"), test::codeHashOf(2, DiskImageBuilder::codeDirectory()));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(signedAndStapled("NEW"))));
+}
+
+TEST_F(CodeSignedDiskImage, UnsignedWithTwoTicketsKeepsItsSyntheticHash) {
+    put(DiskImageBuilder());
+    const auto hash = reopen()->cdHash();
+    put(DiskImageBuilder().superblob(stapled("ONE").blob(0x10002, ticketBlob("TWO"))));
+    EXPECT_EQ(reopen()->ticketData(), foundation::toData("TWO"));
+    EXPECT_EQ(reopen()->cdHash(), hash);
+    EXPECT_EQ(staple("NEW"), hash);
+}
+
 }  // namespace
 }  // namespace pinwell
