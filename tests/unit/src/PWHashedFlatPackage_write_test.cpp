@@ -116,6 +116,31 @@ TEST_F(FlatPackageWriting, AChainOfUnknownTrailersAloneIsWrittenFromOffset0AsWel
     EXPECT_EQ(contents(), PackageBuilder().archive({}).unknown("one").ticket("NEW TICKET").build());
 }
 
+// A ticket at offset 0, with no terminator met, looks like no chain at all: a new one is begun behind it.
+TEST_F(FlatPackageWriting, ATicketAtTheStartOfTheFileStaysAndAChainIsBegunBehindIt) {
+    const PackageBuilder ticketAlone = PackageBuilder().archive({}).ticket("OLD");
+    put(ticketAlone);
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(contents(), PackageBuilder(ticketAlone).terminator().ticket("NEW TICKET").build());
+    EXPECT_EQ(package.appropriateExitCode(), 0);
+}
+
+TEST_F(FlatPackageWriting, DeletingATicketAtTheStartOfTheFileEndsTheChainBehindIt) {
+    const PackageBuilder ticketAlone = PackageBuilder().archive({}).ticket("OLD");
+    put(ticketAlone);
+    EXPECT_TRUE(unstaple());
+    EXPECT_EQ(contents(), PackageBuilder(ticketAlone).terminator().build());
+    PWHashedFlatPackage fresh{url, platform.services()};
+    EXPECT_EQ(fresh.ticketData(), std::nullopt);
+}
+
+// Its place is kept, so that the next ticket takes it.
+TEST_F(FlatPackageWriting, ATicketRecordWithoutDataIsReplaced) {
+    put(PackageBuilder().terminator().ticket(""));
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(contents(), PackageBuilder().terminator().ticket("NEW TICKET").build());
+}
+
 TEST_F(FlatPackageWriting, WhereTheVolumeClonesTheNewFileIsSwappedIn) {
     platform.files.answerCloning(true);
     put(PackageBuilder());
