@@ -196,6 +196,10 @@ TEST_F(CommandLine, APathCannotDriveTheTerminal) {
         Ended(66, ElementsAre(StartsWith("File " + missing("\\x1b]0;title\\x07\\n") + " does not exist. "))));
 }
 
+TEST_F(CommandLine, TheExecutableSaysWhatVersionItIs) {
+    EXPECT_THAT(readFile(PINWELL_PROGRAM), testing::HasSubstr("@(#)PROGRAM:pinwell  PROJECT:pinwell-34\n"));
+}
+
 TEST_F(CommandLine, AVerboseRunTellsEveryStepInOrder) {
     const ProcessResult result = pinwell({"staple", "-v", bundle});
     ASSERT_EQ(result.exitStatus, 0);

@@ -125,6 +125,18 @@ TEST_F(Bundle, NeverReplacesACompatibilityLink) {
     EXPECT_EQ(std::filesystem::read_symlink(ticketPath()), "elsewhere");
 }
 
+TEST_F(Bundle, NeverReplacesADirectoryInTheTicketsPlaceWhichItTakesForALink) {
+    test::writeFile(ticketPath() + "/inside", std::string_view("kept"));
+    std::optional<Error> error = Error::osStatus(1);
+    const MessageCapture output(kVerbosityVerbose);
+    EXPECT_FALSE(bundle.writeNewTicketDataFromURL(source(), &error));
+    EXPECT_EQ(output.text(), foundation::processName() + " will not replace the compatibility symlink at " +
+                                 ticketURL().absoluteString() + ". Please remove it manually\n");
+    EXPECT_EQ(bundle.appropriateExitCode(), 73);
+    EXPECT_FALSE(error.has_value());
+    EXPECT_EQ(test::readFile(ticketPath() + "/inside"), "kept");
+}
+
 TEST_F(Bundle, WithoutAContentsDirectoryFailsAtTheRemoval) {
     test::writeFile(platform.directory / "tool", std::string_view("flat"));
     PWHashedBundle flat{platform.directory.url("tool"), platform.services()};

@@ -272,6 +272,21 @@ TEST_F(SafeReplacement, WhenTheCopyFailsWritesInPlaceAndSwapsNothing) {
     EXPECT_EQ(platform.files.count("replaceItem"), 0U);
 }
 
+TEST_F(SafeReplacement, InPlaceLeavesTheCallersErrorAlone) {
+    std::optional<Error> error = Error::osStatus(1);
+    platform.files.fail("copyItem", ENOSPC);
+    EXPECT_TRUE(staple(&error));
+    EXPECT_EQ(error, Error::osStatus(1)) << "nor does it hand out why there was no copy";
+    platform.files.answerCloning(false);
+    EXPECT_TRUE(staple(&error));
+    EXPECT_EQ(error, Error::osStatus(1));
+}
+
+TEST_F(SafeReplacement, MayBeCalledWithoutAPlaceForTheError) {
+    platform.files.fail("replaceItem", EBUSY);
+    EXPECT_TRUE(staple(nullptr));
+}
+
 TEST_F(SafeReplacement, AFailedWriteLeavesTheFileAndTheCopyAndTheCallersErrorAlone) {
     file.writeSucceeds = false;
     std::optional<Error> error = Error::osStatus(1);

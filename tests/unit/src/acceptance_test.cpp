@@ -1,6 +1,7 @@
 // The controller's judgement of tickets, the storing of a downloaded one, and the final report.
 #include <gtest/gtest.h>
 
+#include <cerrno>
 #include <filesystem>
 
 #include "src/DownloadDelegate.h"
@@ -211,6 +212,29 @@ TEST_F(Acceptance, AFailedStapleLeavesTheWritersCodeAndHandsOutItsError) {
     EXPECT_FALSE(error.has_value());  // the refusal to replace it has no error object
 }
 
+// A kind whose write answers what the test says, and never sets a code.
+struct SilentFile : PWHashedBundle {
+    using PWHashedBundle::PWHashedBundle;
+    bool writeNewTicketDataFromURL(const URL& source, ErrorOut error) override {
+        writtenFrom = source;
+        if (error != nullptr) *error = writes ? std::nullopt : std::optional(Error::posix(EROFS));
+        return writes;
+    }
+    bool writes = false;
+    std::optional<URL> writtenFrom;
+};
+
+TEST_F(Acceptance, AFailedStapleThatSetsNoCodeLeaves0AndHandsOutItsError) {
+    const auto silent = std::make_shared<SilentFile>(platform.directory.url("App.app"), platform.services());
+    controller->setHashedFile(silent);
+    controller->setOperation(kOperationStaple);
+    std::optional<Error> error;
+    controller->writeDownloadedData(unsignedTicket({hash(0xAB)}), &error);
+    EXPECT_EQ(silent->writtenFrom, controller->tempFileURL());
+    EXPECT_EQ(silent->appropriateExitCode(), 0);
+    EXPECT_EQ(error, Error::posix(EROFS));
+}
+
 class Report : public Acceptance {
   protected:
     std::optional<int> report() {
@@ -237,6 +261,28 @@ TEST_F(Report, ASwallowedWriteFailureIsFoundWhenReadingBack) {
               "Although we wrote the ticket, the written data did not validate. Please restore " +
                   (platform.directory / "App.app") + " from backup to try again.");
     EXPECT_EQ(output.lines()[2], "The staple and validate action failed! Error 73.");
+}
+
+TEST_F(Report, AFailedStapleThatSetsNoCodeIsFoundWhenReadingBack) {
+    controller->setHashedFile(
+        std::make_shared<SilentFile>(platform.directory.url("App.app"), platform.services()));
+    controller->setOperation(kOperationStaple);
+    controller->writeDownloadedData(unsignedTicket({hash(0xAB)}), nullptr);
+    EXPECT_EQ(report(), 73);
+}
+
+TEST_F(Report, AStapledTicketThatReadsBackRevokedIsReportedAsBothAndEndsWith73) {
+    controller->setOperation(kOperationStaple);
+    file->setAppropriateExitCode(0);
+    test::writeFile(stapledPath(), foundation::ByteView(unsignedTicket({hash(0xAB)}, 1)));
+    const MessageCapture output(kVerbosityNormal);
+    EXPECT_EQ(report(), 73);
+    ASSERT_EQ(output.lines().size(), 3U);
+    EXPECT_EQ(output.lines()[1],
+              "Although we wrote the ticket, the written data did not validate. Please restore " +
+                  (platform.directory / "App.app") + " from backup to try again.");
+    EXPECT_EQ(output.lines()[2],
+              "The ticket for App.app has been revoked. Tollmark will prevent it from running.");
 }
 
 TEST_F(Report, AnArtefactThatVanishedAfterTheStapleEndsWith73) {

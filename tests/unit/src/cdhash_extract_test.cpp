@@ -64,6 +64,14 @@ TEST_F(BasicCodeProperties, WithoutASecureTimestampLackIt) {
     EXPECT_EQ(properties().dictionary()->size(), 5U);
 }
 
+TEST_F(BasicCodeProperties, OfASignatureThatNamesNothingButItsHashAreTheHashAlone) {
+    codesign::SigningInformation hashAlone;
+    hashAlone.unique = Data(20, std::byte{0xAB});
+    platform.codeSigning.information = hashAlone;
+    EXPECT_EQ(properties(), Value(Dictionary{{"cdhash", Data(20, std::byte{0xAB})}}));
+    EXPECT_TRUE(platform.systemLog.entries().empty());
+}
+
 TEST_F(BasicCodeProperties, OfUnsignedOrDamagedCodeAreEmptyAndSilent) {
     platform.codeSigning.validity = codesign::kUnsigned;
     const test::MessageCapture output(kVerbosityVerbose);

@@ -1,6 +1,7 @@
 // Tickets that are fetched as an asset of their own.
 #include <gtest/gtest.h>
 
+#include <cerrno>
 #include <filesystem>
 
 #include "src/messages.h"
@@ -142,6 +143,40 @@ TEST_F(LargeTicket, ATicketOfTheRightSizeThatFailsTheCheckEndsWith65) {
     const MessageCapture output(kVerbosityNormal);
     EXPECT_EQ(finish(other), 65);
     EXPECT_EQ(output.lines()[0], "Could not validate ticket for " + run.artefact());
+}
+
+// An answer that has no status has none that is wrong.
+TEST_F(LargeTicket, AnAnswerThatIsNoHTTPResponseIsJudgedByItsBody) {
+    run.controller.setLargeTicketSize(ticket.size());
+    start("https://assets.example/${f}");
+    const auto& session = run.platform.https.sessions.back();
+    test::writeFile(run.platform.directory / "tmp/download", foundation::ByteView(ticket));
+    const MessageCapture output(kVerbosityVerbose);
+    EXPECT_EQ(run.platform.exitStatusOf([&] {
+        run.controller.didFinishDownloading(*session, *session->downloadTasks.at(0),
+                                            run.platform.directory.url("tmp/download"));
+    }),
+              0);
+    EXPECT_TRUE(output.contains("Big ticket response is (null)"));
+}
+
+TEST_F(LargeTicket, ADownloadThatCannotBeReadIsOfSize0) {
+    run.controller.setLargeTicketSize(ticket.size());
+    run.platform.files.fail("contentsOfFile", EIO);
+    const MessageCapture output(kVerbosityNormal);
+    EXPECT_EQ(finish(ticket), 65);
+    EXPECT_EQ(output.lines()[0], "We were expecting a ticket size of " + std::to_string(ticket.size()) +
+                                     " but download a ticket of size 0");
+}
+
+TEST_F(LargeTicket, ADownloadThatCannotBeReadAndIsAnnouncedAsEmptyCannotBeSaved) {
+    run.controller.setLargeTicketSize(0);
+    run.platform.files.fail("contentsOfFile", EIO);
+    run.file->setAppropriateExitCode(66);
+    const MessageCapture output(kVerbosityNormal);
+    EXPECT_EQ(finish(ticket), 66);
+    EXPECT_EQ(output.lines(), (std::vector<std::string>{"Could not save data. A parameter was not valid.",
+                                                        "The validate action failed! Error 66."}));
 }
 
 TEST_F(LargeTicket, AFailedDownloadRecords68NamesThePathAndDoesNotEndTheRun) {
