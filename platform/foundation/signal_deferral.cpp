@@ -1,0 +1,47 @@
+#include "foundation/signal_deferral.h"
+
+#include <unistd.h>
+
+#include <array>
+#include <atomic>
+#include <csignal>
+#include <cstddef>
+
+namespace pinwell::foundation {
+namespace {
+
+constexpr std::array kDeferred{SIGHUP, SIGINT, SIGTERM};
+
+// A handler is given nothing but its signal's number: what it leaves, and what shall be put back when it has
+// done, has to stand where it can find it.
+std::array<std::atomic<bool>, kDeferred.size()> arrived;
+static_assert(std::atomic<bool>::is_always_lock_free, "a signal handler may touch nothing else");
+std::array<struct sigaction, kDeferred.size()> before;
+
+void note(int number) {
+    for (std::size_t i = 0; i < kDeferred.size(); ++i)
+        if (kDeferred.at(i) == number) arrived.at(i) = true;
+}
+
+}  // namespace
+
+SignalDeferral::SignalDeferral() {
+    struct sigaction noting {};
+    noting.sa_handler = note;
+    noting.sa_flags = SA_RESTART;  // nothing is to notice
+    sigemptyset(&noting.sa_mask);
+    for (std::size_t i = 0; i < kDeferred.size(); ++i) {
+        arrived.at(i) = false;
+        sigaction(kDeferred.at(i), nullptr, &before.at(i));
+        // Ignored from the start, by nohup(1) for instance: it is the caller's wish.
+        if (before.at(i).sa_handler != SIG_IGN) sigaction(kDeferred.at(i), &noting, nullptr);
+    }
+}
+
+SignalDeferral::~SignalDeferral() {
+    for (std::size_t i = 0; i < kDeferred.size(); ++i) sigaction(kDeferred.at(i), &before.at(i), nullptr);
+    for (std::size_t i = 0; i < kDeferred.size(); ++i)
+        if (arrived.at(i)) kill(getpid(), kDeferred.at(i));
+}
+
+}  // namespace pinwell::foundation

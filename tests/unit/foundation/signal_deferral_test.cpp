@@ -1,0 +1,89 @@
+#include "foundation/signal_deferral.h"
+
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <csignal>
+#include <cstdlib>
+#include <optional>
+#include <thread>
+
+namespace pinwell::foundation {
+namespace {
+
+std::atomic<int> taken = 0;
+
+class Deferral : public testing::Test {
+  protected:
+    Deferral() {
+        taken = 0;
+        for (const int number : {SIGHUP, SIGINT, SIGTERM}) std::signal(number, [](int) { ++taken; });
+    }
+    ~Deferral() override {
+        for (const int number : {SIGHUP, SIGINT, SIGTERM}) std::signal(number, SIG_DFL);
+    }
+
+    static void send(int number) { kill(getpid(), number); }
+};
+
+TEST_F(Deferral, LetsSignalsHaveTheirEffectWhenItEnds) {
+    {
+        const SignalDeferral deferral;
+        for (const int number : {SIGHUP, SIGINT, SIGTERM}) send(number);
+        EXPECT_EQ(taken, 0);
+    }
+    EXPECT_EQ(taken, 3);
+}
+
+TEST_F(Deferral, PassesOnNoSignalThatDidNotCome) {
+    { const SignalDeferral deferral; }
+    EXPECT_EQ(taken, 0);
+    send(SIGINT);
+    EXPECT_EQ(taken, 1);
+}
+
+TEST_F(Deferral, ForgetsWhatAnEarlierOneHasSeen) {
+    {
+        const SignalDeferral deferral;
+        send(SIGINT);
+    }
+    { const SignalDeferral deferral; }
+    EXPECT_EQ(taken, 1);
+}
+
+TEST_F(Deferral, HoldsForSignalsThatAnotherThreadTakes) {
+    std::optional<SignalDeferral> deferral(std::in_place);
+    std::thread([] { pthread_kill(pthread_self(), SIGTERM); }).join();
+    EXPECT_EQ(taken, 0);
+    deferral.reset();
+    EXPECT_EQ(taken, 1);
+}
+
+TEST_F(Deferral, LeavesAnIgnoredSignalIgnored) {
+    std::signal(SIGHUP, SIG_IGN);
+    {
+        const SignalDeferral deferral;
+        send(SIGHUP);
+    }
+    EXPECT_EQ(taken, 0);
+    struct sigaction now {};
+    sigaction(SIGHUP, nullptr, &now);
+    EXPECT_EQ(now.sa_handler, SIG_IGN);
+}
+
+TEST(DeferralDeathTest, EndsTheProcessAfterwards) {
+    EXPECT_EXIT(
+        {
+            {
+                const SignalDeferral deferral;
+                kill(getpid(), SIGTERM);
+                std::fputs("finished", stderr);
+            }
+            std::_Exit(0);
+        },
+        testing::KilledBySignal(SIGTERM), "finished");
+}
+
+}  // namespace
+}  // namespace pinwell::foundation
