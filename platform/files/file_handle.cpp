@@ -1,5 +1,6 @@
 #include "files/file_handle.h"
 
+#include <fcntl.h>
 #include <unistd.h>
 
 #include <limits>
@@ -24,6 +25,16 @@ class LocalFileHandle final : public FileHandle {
         auto data = readUpTo(file_, length);
         if (!data) fail("read", data.error());
         return std::move(*data);
+    }
+
+    void reserve(std::uint64_t length) override {
+        const off_t size = offset("reserve room in", length);
+        const auto from = offset("reserve room in", position());
+        if (uninterrupted([&] { return fallocate(file_.number(), FALLOC_FL_KEEP_SIZE, from, size); }) == 0)
+            return;
+        // No promise to be had here: the writing itself will tell.
+        if (errno == EOPNOTSUPP || errno == ENOSYS) return;
+        fail("reserve room in", lastError(file_.path));
     }
 
     void write(ByteView bytes) override {

@@ -33,6 +33,22 @@ struct ItemFacts {
     bool isExecutable = false;  // any execute bit
 };
 
+/// What tells an item as it is now from the same path later: another file in its place, another length, other
+/// contents. A change that keeps the length, in the same tick of the file system's clock as the one before it
+/// (4 ms or so before Linux 6.13), does not show.
+struct ItemState {
+    std::uint64_t device = 0;
+    std::uint64_t inode = 0;
+    std::uint64_t size = 0;
+    // Contents, and anything at all; since the epoch.
+    std::int64_t modifiedSeconds = 0;
+    std::int64_t modifiedNanoseconds = 0;
+    std::int64_t changedSeconds = 0;
+    std::int64_t changedNanoseconds = 0;
+
+    bool operator==(const ItemState&) const = default;
+};
+
 /// What the type service says of an item.
 struct ItemType {
     std::string identifier;
@@ -78,6 +94,11 @@ class FileHandle {
     /// Up to `length` bytes; fewer only at the end of the file. Memory grows with what is really read.
     virtual Data read(std::uint64_t length) = 0;
 
+    /// Sees to it that the next `length` bytes from the position on will find room on the volume, where the
+    /// file system can promise that; the file is as long as before. A volume that is full says so here, while
+    /// nothing has been overwritten yet.
+    virtual void reserve(std::uint64_t length) = 0;
+
     /// Writes all of `bytes`.
     virtual void write(ByteView bytes) = 0;
 
@@ -89,6 +110,12 @@ class FileHandle {
 
     /// Closes and reports. Further calls are errors; closing twice is none.
     virtual void close() = 0;
+};
+
+/// Holds an item against other writers that ask, until it dies.
+class ItemLock {
+  public:
+    virtual ~ItemLock() = default;
 };
 
 /// Longest file that is ever read whole: no ticket, nor anything else that is read so, comes near it.
@@ -103,6 +130,15 @@ class FileManager {
 
     /// The item itself, not what a link leads to.
     virtual Result<bool> isRegularFile(const URL& item) = 0;
+
+    /// The item itself, not what a link leads to.
+    virtual Result<ItemState> stateOfItem(const URL& item) = 0;
+
+    /// An advisory lock (flock(2), exclusive) on the file or directory that the path names once the lock is
+    /// had, whatever stood there when the waiting began. Waits for a minute at most (EBUSY). Other errors say
+    /// that there is nothing to lock, or that its file system knows no locks. Nothing is kept from those who
+    /// do not ask.
+    virtual Result<std::unique_ptr<ItemLock>> lockItem(const URL& item) = 0;
 
     /// Main executable of the directory, opened as a bundle.
     virtual std::optional<URL> mainExecutableOfBundle(const URL& directory) = 0;
@@ -149,8 +185,8 @@ class FileManager {
 
     /// Writes a file of mode 0600 and flushes its contents to stable storage. Atomically: to a file beside it
     /// that is then renamed into place, replacing whatever non-directory is there; a failure leaves nothing
-    /// behind. Otherwise plainly: a new file, which a failure removes, or an existing regular file
-    /// overwritten, which a failure leaves half written; the directory is not flushed.
+    /// behind. Otherwise plainly: a new file, which a failure removes, and whose name is on stable storage
+    /// too; or an existing regular file overwritten, which a failure leaves half written.
     enum class Writing { plain, atomic };
     virtual Result<void> writeFile(ByteView contents, const URL& file, Writing writing) = 0;
 

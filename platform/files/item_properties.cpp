@@ -26,6 +26,18 @@ Result<ResourceProperties> resourcePropertiesOfItem(const URL& item, const TypeN
                               facts.isSymbolicLink, type.identifier, type.localizedDescription};
 }
 
+Result<ItemState> stateOfItemAt(const std::string& path) {
+    const auto status = statusOfItem(path);
+    if (!status) return status.error();
+    return ItemState{.device = status->st_dev,
+                     .inode = status->st_ino,
+                     .size = static_cast<std::uint64_t>(status->st_size),
+                     .modifiedSeconds = status->st_mtim.tv_sec,
+                     .modifiedNanoseconds = status->st_mtim.tv_nsec,
+                     .changedSeconds = status->st_ctim.tv_sec,
+                     .changedNanoseconds = status->st_ctim.tv_nsec};
+}
+
 Result<bool> itemIsRegularFile(const std::string& path) {
     const auto status = statusOfItem(path);
     if (!status) return status.error();

@@ -8,6 +8,8 @@
 namespace pinwell::files {
 
 Result<ResourceProperties> resourcePropertiesOfItem(const URL& item, const TypeNaming& typeNaming);
+Result<ItemState> stateOfItemAt(const std::string& path);
+
 Result<bool> itemIsRegularFile(const std::string& path);
 
 }  // namespace pinwell::files

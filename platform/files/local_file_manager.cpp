@@ -7,6 +7,7 @@
 #include "files/copy.h"
 #include "files/file_handle.h"
 #include "files/file_manager.h"
+#include "files/item_lock.h"
 #include "files/item_properties.h"
 #include "files/posix.h"
 #include "files/removal.h"
@@ -47,6 +48,12 @@ class LocalFileManager final : public FileManager {
     }
 
     Result<bool> isRegularFile(const URL& item) override { return onPath(item, itemIsRegularFile); }
+
+    Result<ItemState> stateOfItem(const URL& item) override { return onPath(item, stateOfItemAt); }
+
+    Result<std::unique_ptr<ItemLock>> lockItem(const URL& item) override {
+        return onPath(item, [](const std::string& path) { return lockPath(path, kLockPatience); });
+    }
 
     std::optional<URL> mainExecutableOfBundle(const URL& directory) override {
         return pathOf(directory) ? mainExecutableIn(directory) : std::nullopt;

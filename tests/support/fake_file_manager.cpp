@@ -122,6 +122,7 @@ class RecordingFileManager::Handle final : public FileHandle {
     Data read(std::uint64_t length) override {
         return note("read"), real_->read(record_->readableOf(length));
     }
+    void reserve(std::uint64_t length) override { note("reserve"), real_->reserve(length); }
     void write(ByteView bytes) override { note("write"), real_->write(bytes); }
     void truncate(std::uint64_t length) override { note("truncate"), real_->truncate(length); }
     void synchronize() override { note("synchronize"), real_->synchronize(); }
@@ -213,6 +214,16 @@ Result<files::ResourceProperties> RecordingFileManager::resourceProperties(const
 Result<bool> RecordingFileManager::isRegularFile(const URL& item) {
     if (auto failure = record_->note("isRegularFile", item.path())) return *failure;
     return real_->isRegularFile(item);
+}
+
+Result<files::ItemState> RecordingFileManager::stateOfItem(const URL& item) {
+    if (auto failure = record_->note("stateOfItem", item.path())) return *failure;
+    return real_->stateOfItem(item);
+}
+
+Result<std::unique_ptr<files::ItemLock>> RecordingFileManager::lockItem(const URL& item) {
+    if (auto failure = record_->note("lockItem", item.path())) return *failure;
+    return real_->lockItem(item);
 }
 
 std::optional<URL> RecordingFileManager::mainExecutableOfBundle(const URL& directory) {

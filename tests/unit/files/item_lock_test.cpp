@@ -1,0 +1,140 @@
+// One writer at a time, also when the file they wait for is replaced meanwhile.
+#include "files/item_lock.h"
+
+#include <fcntl.h>
+#include <sys/file.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <filesystem>
+#include <future>
+
+#include "fixture.h"
+#include "foundation/file_io.h"
+#include "support/volume.h"
+
+namespace pinwell::test {
+namespace {
+
+using namespace std::chrono_literals;
+using files::lockPath;
+
+class Lock : public FilesTest {
+  protected:
+    Lock() { writeFile(path("file"), "contents"); }
+
+    bool isLocked(std::string_view name) const {
+        const foundation::FileDescriptor file(open(path(name).c_str(), O_RDONLY | O_CLOEXEC));
+        return flock(file.get(), LOCK_EX | LOCK_NB) != 0 && errno == EWOULDBLOCK;
+    }
+};
+
+TEST_F(Lock, HoldsUntilItDies) {
+    {
+        const auto lock = manager->lockItem(url("file"));
+        ASSERT_THAT(lock, Succeeds());
+        EXPECT_TRUE(isLocked("file"));
+    }
+    EXPECT_FALSE(isLocked("file"));
+    EXPECT_EQ(readFile(path("file")), "contents");
+}
+
+TEST_F(Lock, IsHadOnADirectoryToo) {
+    makeDirectory(path("directory"));
+    const auto lock = manager->lockItem(url("directory"));
+    ASSERT_THAT(lock, Succeeds());
+    EXPECT_TRUE(isLocked("directory"));
+}
+
+TEST_F(Lock, ThatAnotherHoldsIsBusyWhenPatienceEnds) {
+    const auto first = lockPath(path("file"), 0ms);
+    ASSERT_THAT(first, Succeeds());
+    EXPECT_THAT(lockPath(path("file"), 0ms), FailsWith(EBUSY, path("file")));
+    EXPECT_THAT(lockPath(path("file"), 30ms), FailsWith(EBUSY, path("file")));
+}
+
+TEST_F(Lock, IsHadWhenTheOtherLetsGo) {
+    auto first = lockPath(path("file"), 0ms);
+    ASSERT_THAT(first, Succeeds());
+    auto second = std::async(std::launch::async, [&] { return manager->lockItem(url("file")); });
+    first = foundation::Error::posix(ECANCELED);
+    ASSERT_THAT(second.get(), Succeeds());
+}
+
+TEST_F(Lock, IsOnTheFileThatThePathNamesOnceItIsHad) {
+    auto first = lockPath(path("file"), 0ms);
+    ASSERT_THAT(first, Succeeds());
+    auto second = std::async(std::launch::async, [&] { return manager->lockItem(url("file")); });
+    writeFile(path("other"), "new");
+    std::filesystem::rename(path("other"), path("file"));
+    first = foundation::Error::posix(ECANCELED);
+    const auto lock = second.get();
+    ASSERT_THAT(lock, Succeeds());
+    EXPECT_TRUE(isLocked("file"));
+}
+
+TEST_F(Lock, IsRefusedWhereThereIsNothingToLock) {
+    makeFifo(path("fifo"));
+    makeLink("file", path("link"));
+    EXPECT_THAT(manager->lockItem(url("none")), FailsWith(ENOENT, path("none")));
+    EXPECT_THAT(manager->lockItem(url("fifo")), FailsWith(EINVAL, path("fifo")));
+    EXPECT_THAT(manager->lockItem(url("link")), FailsWith(ELOOP, path("link")));
+}
+
+class State : public FilesTest {
+  protected:
+    State() { writeFile(path("file"), "contents"); }
+    files::ItemState state() { return *manager->stateOfItem(url("file")); }
+};
+
+TEST_F(State, StaysWhenTheFileIsReadAndCloned) {
+    const auto before = state();
+    readFile(path("file"));
+    ASSERT_THAT(manager->volumeSupportsCloning(url("file")), Succeeds());
+    ASSERT_THAT(manager->copyItem(url("file"), url("copy")), Succeeds());
+    EXPECT_EQ(state(), before);
+}
+
+TEST_F(State, StaysWhenTheFileIsClonedOnVolumesThatClone) {
+    for (const char* fileSystem : {"xfs", "btrfs"}) {
+        const Volume volume(fileSystem);
+        if (volume.missing()) GTEST_SKIP() << *volume.missing();
+        const auto file = files::URL::fileURLWithPath(volume / "file");
+        writeFile(file.path(), irregularBytes(100'000));
+        const auto before = manager->stateOfItem(file);
+        ASSERT_TRUE(*manager->volumeSupportsCloning(file));
+        ASSERT_THAT(manager->copyItem(file, files::URL::fileURLWithPath(volume / "copy")), Succeeds());
+        sync();
+        EXPECT_EQ(*manager->stateOfItem(file), *before) << fileSystem;
+    }
+}
+
+TEST_F(State, TellsAnotherLength) {
+    const auto before = state();
+    writeFile(path("file"), "longer contents");
+    EXPECT_NE(state(), before);
+}
+
+TEST_F(State, TellsAnotherFileInItsPlace) {
+    const auto before = state();
+    writeFile(path("other"), "contents");
+    std::filesystem::rename(path("other"), path("file"));
+    EXPECT_NE(state(), before);
+}
+
+TEST_F(State, TellsTimesANanosecondApart) {
+    for (const long nanoseconds : {1L, 2L}) {
+        const std::array<timespec, 2> times{timespec{0, UTIME_OMIT}, timespec{1000, nanoseconds}};
+        ASSERT_EQ(utimensat(AT_FDCWD, path("file").c_str(), times.data(), 0), 0);
+        EXPECT_EQ(state().modifiedSeconds, 1000);
+        EXPECT_EQ(state().modifiedNanoseconds, nanoseconds);
+    }
+}
+
+TEST_F(State, OfWhatIsNotThereIsAnError) {
+    EXPECT_THAT(manager->stateOfItem(url("none")), FailsWith(ENOENT, path("none")));
+}
+
+}  // namespace
+}  // namespace pinwell::test
