@@ -4,8 +4,10 @@
 #include <malloc.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <csignal>
 #include <cstdlib>
+#include <memory>
 #include <string>
 #include <string_view>
 
@@ -73,9 +75,28 @@ std::uint8_t operationForCommand(std::string_view command) {
     return kOperationNone;
 }
 
+// False when another process has it. What cannot be locked, since there is no such file or its file system
+// knows no locks, is left to those that come after: before they write, they look at what has changed in the
+// meantime.
+bool lockArtefact(const Platform& platform, const URL& path, std::unique_ptr<files::ItemLock>& lock) {
+    auto locked = platform.files.lockItem(path);
+    if (locked) {
+        lock = *std::move(locked);
+        return true;
+    }
+    if (locked.error().code() != EBUSY) return true;
+    MessageLog("Another process keeps %@ locked. Nothing was written to it.", path.path());
+    return false;
+}
+
 int run(const URL& path) {
     const HostPlatform host([](int status) { std::exit(status); });
     const Platform platform = host.services();
+
+    // Held to the end: of two staples of one artefact, the second begins to read when the first has read back
+    // what it wrote.
+    std::unique_ptr<files::ItemLock> lock;
+    if (operation == kOperationStaple && !lockArtefact(platform, path, lock)) return kExitCannotCreate;
 
     const auto hashedFile = PWHashedFile::initWithFileURL(path, platform);
     if (hashedFile == nullptr) return kExitNoInput;
@@ -100,6 +121,8 @@ int main(int argc, char** argv) {
     foundation::occupyStandardStreams();
     // A reader that has gone away must not stop a staple half-way.
     std::signal(SIGPIPE, SIG_IGN);
+    // The same for a file that would grow beyond the caller's limit: the write then fails, and says so.
+    std::signal(SIGXFSZ, SIG_IGN);
 
     if (argc <= 2) {
         printUsage();

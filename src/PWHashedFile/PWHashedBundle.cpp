@@ -1,6 +1,7 @@
 #include "src/PWHashedFile/PWHashedBundle.h"
 
 #include "foundation/process.h"
+#include "foundation/signal_deferral.h"
 #include "src/cdhash_extract.h"
 #include "src/messages.h"
 
@@ -27,6 +28,7 @@ std::optional<Data> PWHashedBundle::_cdHash() {
 }
 
 bool PWHashedBundle::writeNewTicketDataFromURL(const URL& source, ErrorOut error) {
+    const foundation::SignalDeferral uninterrupted;
     files::FileManager& files = platform().files;
     const URL ticket = codeResourcesURL();
     const auto fail = [&](std::optional<Error> reason) {

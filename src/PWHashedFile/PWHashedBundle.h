@@ -18,6 +18,7 @@ class PWHashedBundle : public PWHashedFile {
     URL codeResourcesURL() const;
 
     /// Not atomic: between the removal of an old ticket and the copy of the new one the bundle has none.
+    /// SIGHUP, SIGINT and SIGTERM take effect afterwards.
     bool writeNewTicketDataFromURL(const URL& source, ErrorOut error) override;
 
     using PWHashedFile::_deleteExistingTicket;  // goes through the base's driver, and raises there

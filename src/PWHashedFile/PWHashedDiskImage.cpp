@@ -38,6 +38,7 @@ PWHashedDiskImage::PWHashedDiskImage(const URL& fileURL, const Platform& platfor
 }
 
 bool PWHashedDiskImage::populateHeader() {
+    noteState();
     const auto opened = platform().files.openForReading(*fileURL());
     if (!opened) {
         NoisyLog("Could not create file handle to %@. %@", *fileURL(), opened.error());

@@ -86,6 +86,7 @@ void PWHashedDiskImage::saveDebugCopy(ByteView signatureAndTrailer, std::optiona
 void PWHashedDiskImage::writeAtEndOfData(files::FileHandle& file, ByteView signatureAndTrailer,
                                          const std::string& name) const {
     file.seek(endOfDMGData_);
+    if (origEOF_ < endOfDMGData_ + signatureAndTrailer.size()) file.reserve(signatureAndTrailer.size());
     file.write(signatureAndTrailer);
     const std::uint64_t end = file.position();
     if (origEOF_ > end) {

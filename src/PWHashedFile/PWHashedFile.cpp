@@ -1,5 +1,6 @@
 #include "src/PWHashedFile/PWHashedFile.h"
 
+#include "foundation/signal_deferral.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
@@ -83,16 +84,38 @@ std::optional<URL> PWHashedFile::makeWorkingCopy() {
     return copy;
 }
 
+void PWHashedFile::noteState() {
+    if (!stateWhenRead_) stateWhenRead_ = platform_.files.stateOfItem(*fileURL_);
+}
+
+bool PWHashedFile::isAsRead() const {
+    if (!stateWhenRead_) return true;
+    const auto now = platform_.files.stateOfItem(*fileURL_);
+    return now && *stateWhenRead_ && *now == **stateWhenRead_;
+}
+
+bool PWHashedFile::refuseChangedFile(const std::optional<URL>& workingCopy) {
+    MessageLog("%@ has changed since it was read. Nothing was written to it.", fileURL_->path());
+    // What cannot be removed is a copy beside the file, and no harm.
+    if (workingCopy) static_cast<void>(platform_.files.removeItem(workingCopy->deletingLastPathComponent()));
+    setAppropriateExitCode(kExitCannotCreate);
+    return false;
+}
+
 bool PWHashedFile::common_writeNewTicketDataFromURL(const std::optional<URL>& source, bool deleteExisting,
                                                     ErrorOut error) {
+    const foundation::SignalDeferral uninterrupted;
     const auto cloning = platform_.files.volumeSupportsCloning(*fileURL_);
     const bool canClone = cloning && *cloning;
     const std::optional<URL> copy = canClone ? makeWorkingCopy() : std::nullopt;
+    if (!isAsRead()) return refuseChangedFile(copy);
 
     std::optional<Error> writeError;  // not handed out: this driver reports the swap's error only
     if (!_writeNewTicketDataFromURL(source, copy.value_or(*fileURL_), deleteExisting, &writeError))
         return false;
     if (!copy) return true;
+    // Asked again: in its place would go what was made from the file as it was.
+    if (!isAsRead()) return refuseChangedFile(copy);
 
     std::optional<Error> reported;
     if (const auto replaced = platform_.files.replaceItem(*fileURL_, *copy); replaced) {

@@ -79,6 +79,10 @@ class PWHashedFile {
     /// The safe-replacement driver under both: works on a clone beside the file and swaps it into place where
     /// the volume can clone, else in place. A failed swap still answers true, with the error handed out:
     /// callers that need to know must look at it.
+    ///
+    /// A file that is no longer what was read (noteState) is not written: false, and exit code 73. SIGHUP,
+    /// SIGINT and SIGTERM take effect when all is done; they would leave a file half written, or a clone
+    /// lying about.
     bool common_writeNewTicketDataFromURL(const std::optional<URL>& source, bool deleteExisting,
                                           ErrorOut error);
 
@@ -99,16 +103,23 @@ class PWHashedFile {
     virtual std::string_view className() const { return "PWHashedFile"; }
     const Platform& platform() const noexcept { return platform_; }
 
+    /// Remembers what state the file is in, the first time only. A kind calls it before it reads what its
+    /// write will go by; without it, every state is good enough to be written to.
+    void noteState();
+
   private:
     [[noreturn]] void mustOverride(std::string_view operation) const;
     std::optional<Data> cached(std::optional<Data>& cache, std::optional<Data> (PWHashedFile::*hook)());
     std::optional<URL> makeWorkingCopy();
+    bool isAsRead() const;
+    bool refuseChangedFile(const std::optional<URL>& workingCopy);
 
     bool revoked_ = false;
     std::int32_t appropriateExitCode_ = kExitOK;
     std::uint32_t digestAlgorithm_ = 0;
     std::optional<URL> fileURL_;
     Platform platform_;
+    std::optional<foundation::Result<files::ItemState>> stateWhenRead_;
 
     std::recursive_mutex mutex_;
     std::optional<Data> internalTicketData_;  // empty: asked, and none found

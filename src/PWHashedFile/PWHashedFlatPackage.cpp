@@ -42,6 +42,7 @@ void mustNotExceed(std::uint64_t limit, std::uint64_t length) {
 }  // namespace
 
 std::optional<Data> PWHashedFlatPackage::_ticketData() {
+    noteState();
     const auto opened = platform().files.openForReading(*fileURL());
     if (!opened) {
         NoisyLog("Could not create file handle to %@. %@", fileURL(), opened.error());

@@ -61,6 +61,7 @@ const char* checksumSize(xar_t archive) {
 }  // namespace
 
 std::optional<Data> PWHashedFlatPackage::_cdHash() {
+    noteState();
     const Archive archive(xar_open(fileURL()->path().c_str(), kReading));
     if (!archive) return std::nullopt;
 

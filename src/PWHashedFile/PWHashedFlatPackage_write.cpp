@@ -55,19 +55,23 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
     return true;
 }
 
-void PWHashedFlatPackage::seekToTicket(files::FileHandle& file) {
+// Where the ticket goes, with room behind it for `length` bytes.
+void PWHashedFlatPackage::seekToTicket(files::FileHandle& file, std::uint64_t length) {
     if (ticketStart_ != 0 || hasTrailers_) {
         file.seek(ticketStart_);
+        if (origEOL_ < ticketStart_ + length) file.reserve(length);
         return;
     }
     file.seekToEnd();
+    file.reserve(kTrailerSize + length);
     file.write(kTerminatorTrailer.bytes);
     ticketStart_ = file.position();
 }
 
 void PWHashedFlatPackage::writeTrailers(files::FileHandle& file, ByteView ticket,
                                         const std::string& targetName) {
-    seekToTicket(file);
+    const std::uint64_t appended = dataToAppend_ ? dataToAppend_->size() : 0;
+    seekToTicket(file, appended + (ticket.empty() ? 0 : ticket.size() + kTrailerSize));
     if (dataToAppend_) file.write(*dataToAppend_);
     if (!ticket.empty()) {
         file.write(ticket);

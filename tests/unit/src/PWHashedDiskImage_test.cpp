@@ -156,10 +156,10 @@ TEST_F(DiskImage, Of511BytesIsTooSmall) {
     EXPECT_EQ(linesOfReading(66), Lines{"image.dmg is too small (511 bytes) to be a proper disk image"});
 }
 
-// The operations of reading, in order: 0 open, 1 seekToEnd, 2 seek and 3 read (trailer), 4 seek and 5 read
-// (superblob).
+// The operations of reading, in order: 0 stateOfItem, 1 open, 2 seekToEnd, 3 seek and 4 read (trailer), 5
+// seek and 6 read (superblob).
 TEST_F(DiskImage, WhoseTrailerCannotBeReadHasNoMagic) {
-    for (const std::size_t operation : {2U, 3U}) {
+    for (const std::size_t operation : {3U, 4U}) {
         test::RecordingFileManager& files = platform.files;
         files.failOperation(files.operations().size() + operation, EIO);
         const Lines lines = linesOfReading(DiskImageBuilder(), 66);
@@ -171,7 +171,7 @@ TEST_F(DiskImage, WhoseTrailerCannotBeReadHasNoMagic) {
 }
 
 TEST_F(DiskImage, WhoseTrailerIsReadShortHasNoMagic) {
-    platform.files.cutRead(3, 511);
+    platform.files.cutRead(4, 511);
     EXPECT_EQ(linesOfReading(DiskImageBuilder(), 66), Lines{"Not a supported disk image format, 0"});
 }
 
@@ -217,7 +217,7 @@ TEST_F(DiskImage, WhoseSignatureDoesNotEndAtTheTrailerIsRefused) {
 }
 
 TEST_F(DiskImage, WhoseSuperblobCannotBeReadIsRefused) {
-    for (const std::size_t operation : {4U, 5U}) {
+    for (const std::size_t operation : {5U, 6U}) {
         test::RecordingFileManager& files = platform.files;
         files.failOperation(files.operations().size() + operation, EIO);
         const Lines lines = linesOfReading(DiskImageBuilder().superblob(emptySuperblob()), 66);
@@ -229,7 +229,7 @@ TEST_F(DiskImage, WhoseSuperblobCannotBeReadIsRefused) {
 }
 
 TEST_F(DiskImage, WhoseSuperblobIsReadShortIsRefusedInSilence) {
-    platform.files.cutRead(5, 11);
+    platform.files.cutRead(6, 11);
     EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(emptySuperblob()), 66),
               Lines{codesignLine(1000, 12)});
 }
@@ -392,8 +392,8 @@ TEST_F(DiskImageAtTheLimits, OfTheNumberOfBlobsAgreesWithTheCodeSigningService) 
 TEST_F(DiskImage, IsNeverReadInFrontOfItsSignature) {
     put(DiskImageBuilder().superblob(DiskImageBuilder::signature()));
     open();
-    EXPECT_EQ(platform.files.names(), (Lines{"openForReading", "handle.seekToEnd", "handle.seek",
-                                             "handle.read", "handle.seek", "handle.read"}));
+    EXPECT_EQ(platform.files.names(), (Lines{"stateOfItem", "openForReading", "handle.seekToEnd",
+                                             "handle.seek", "handle.read", "handle.seek", "handle.read"}));
 }
 
 TEST_F(DiskImage, AnswersItsTicketWithoutTheBlobsHeader) {

@@ -157,6 +157,22 @@ TEST_F(DiskImageWriting, TouchesTheImageWithOneSeekAndOneWriteAndFlushesIt) {
                      "handle.synchronize", "handle.close"}));
 }
 
+TEST_F(DiskImageWriting, FindsRoomForWhatWillBeLongerBeforeItOverwritesAnything) {
+    ASSERT_TRUE(write(DiskImageBuilder(), "TICKET"));
+    const auto names = platform.files.names();
+    const auto opened = std::find(names.begin(), names.end(), "openForUpdating");
+    EXPECT_EQ(Lines(opened, names.end()),
+              (Lines{"openForUpdating", "handle.seek", "handle.reserve", "handle.write", "handle.position",
+                     "handle.synchronize", "handle.close"}));
+}
+
+TEST_F(DiskImageWriting, OnAVolumeWithoutRoomLeavesTheImageUntouched) {
+    platform.files.fail("handle.reserve", ENOSPC);
+    EXPECT_FALSE(write(DiskImageBuilder(), "TICKET"));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder()));
+    EXPECT_EQ(exitCode, 73);
+}
+
 TEST_F(DiskImageWriting, KeepsDescribingTheFileAsItWasRead) {
     put(DiskImageBuilder().superblob(stapled("OLD")));
     test::writeFile(directory / "new.ticket", std::string_view("NEWER"));
@@ -297,14 +313,14 @@ TEST_F(DiskImageWriting, MayBeCalledWithoutAPlaceForTheError) {
 class FailingDiskImageWriting : public DiskImageWriting, public testing::WithParamInterface<const char*> {
   protected:
     FailingDiskImageWriting() {
-        // Reading comes first and must work: six operations, of which two are seeks.
+        // Reading comes first and must work: seven operations, of which two are seeks.
         const std::string operation = GetParam();
         put(image);
         const auto before = platform.files.operations().size();
         test::writeFile(directory / "new.ticket", std::string_view("NEW"));
         opened.emplace(url, platform.services());
         platform.files.fail("handle." + operation, EIO);
-        EXPECT_EQ(platform.files.operations().size() - before, 6U);
+        EXPECT_EQ(platform.files.operations().size() - before, 7U);
     }
 
     bool run(bool deleteExisting) {

@@ -2,8 +2,12 @@
 
 #include <gtest/gtest.h>
 
+#include <unistd.h>
+
 #include <atomic>
+#include <csignal>
 #include <filesystem>
+#include <functional>
 #include <thread>
 
 #include "src/PWHashedFile/PWHashedBundle.h"
@@ -103,6 +107,7 @@ TEST_F(Factory, ASymbolicLinkIsNotFollowed) {
 // A kind whose hooks answer what the test says and count their calls.
 class ProbeFile : public PWHashedFile {
   public:
+    using PWHashedFile::noteState;
     using PWHashedFile::PWHashedFile;
 
     std::optional<Data> _ticketData() override {
@@ -124,6 +129,7 @@ class ProbeFile : public PWHashedFile {
             return false;
         }
         test::writeFile(target.path(), std::string_view("NEW"));
+        if (whileWriting) whileWriting();
         setAppropriateExitCode(kExitOK);
         return true;
     }
@@ -132,6 +138,7 @@ class ProbeFile : public PWHashedFile {
     std::atomic<int> ticketCalls = 0;
     std::atomic<int> hashCalls = 0;
     bool writeSucceeds = true;
+    std::function<void()> whileWriting;
     std::optional<URL> writtenSource;
     std::optional<URL> writtenTarget;
     bool deleting = false;
@@ -329,6 +336,119 @@ TEST_F(SafeReplacement, ACopyThatCannotBeTrashedIsSilentAndNoError) {
     EXPECT_FALSE(error.has_value());
     EXPECT_EQ(output.lines().size(), 2U);
 }
+
+// A file that was read before, so that a write goes by what it was then.
+class ChangedFile : public SafeReplacement {
+  protected:
+    ChangedFile() { file.noteState(); }
+
+    static void changeOnce(const std::string& changed) {
+        // The clock of the file system may stand still between two changes; the length does not.
+        test::writeFile(changed, std::string_view("CHANGED"));
+    }
+    void expectRefused() {
+        const MessageCapture output(kVerbosityNormal);
+        EXPECT_FALSE(staple());
+        EXPECT_EQ(output.lines(), std::vector<std::string>{
+                                      path + " has changed since it was read. Nothing was written to it."});
+        EXPECT_EQ(file.appropriateExitCode(), 73);
+        for (const auto& entry : std::filesystem::directory_iterator(platform.directory.path()))
+            EXPECT_EQ(entry.path().filename().native().find(".pinwell"), std::string::npos) << entry.path();
+    }
+};
+
+TEST_F(ChangedFile, IsWrittenWhenNothingHasHappenedToIt) {
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(test::readFile(path), "NEW");
+}
+
+TEST_F(ChangedFile, IsNotWrittenInPlace) {
+    platform.files.answerCloning(false);
+    changeOnce(path);
+    expectRefused();
+    EXPECT_FALSE(file.writtenTarget.has_value());
+    EXPECT_EQ(test::readFile(path), "CHANGED");
+}
+
+TEST_F(ChangedFile, IsNotReplaced) {
+    changeOnce(path);
+    expectRefused();
+    EXPECT_EQ(test::readFile(path), "CHANGED");
+}
+
+TEST_F(ChangedFile, ThatChangesWhileItsCloneIsWrittenIsNotReplaced) {
+    file.whileWriting = [&] { changeOnce(path); };
+    expectRefused();
+    EXPECT_EQ(test::readFile(path), "CHANGED");
+    EXPECT_EQ(platform.files.count("replaceItem"), 0U);
+}
+
+TEST_F(ChangedFile, IsOneThatAnotherOfTheSameContentsHasReplaced) {
+    test::writeFile(platform.directory / "other", std::string_view("OLD"));
+    std::filesystem::rename(platform.directory / "other", path);
+    expectRefused();
+}
+
+TEST_F(ChangedFile, IsOneThatIsGone) {
+    std::filesystem::remove(path);
+    platform.files.answerCloning(false);
+    expectRefused();
+    EXPECT_FALSE(std::filesystem::exists(path));
+}
+
+TEST_F(ChangedFile, IsOneWhoseStateCannotBeTold) {
+    platform.files.fail("stateOfItem", EIO);
+    expectRefused();
+    EXPECT_EQ(test::readFile(path), "OLD");
+}
+
+TEST_F(SafeReplacement, OfAFileWhoseStateCouldNotBeToldWhenItWasReadIsRefused) {
+    platform.files.fail("stateOfItem", EIO);
+    file.noteState();
+    platform.files.fail("stateOfItem", 0);
+    EXPECT_FALSE(staple());
+    EXPECT_EQ(file.appropriateExitCode(), 73);
+    EXPECT_EQ(test::readFile(path), "OLD");
+}
+
+// What interrupts a write, and what for: the whole process, as a terminal does it.
+class InterruptedReplacement : public SafeReplacement, public testing::WithParamInterface<int> {
+  protected:
+    InterruptedReplacement() {
+        std::signal(GetParam(), [](int) { taken = true; });
+    }
+    ~InterruptedReplacement() override { std::signal(GetParam(), SIG_DFL); }
+
+    static inline std::atomic<bool> taken = false;
+};
+
+TEST_P(InterruptedReplacement, IsFinishedFirst) {
+    for (const bool clones : {true, false}) {
+        taken = false;
+        platform.files.answerCloning(clones);
+        bool takenTooEarly = true;
+        file.whileWriting = [&] {
+            kill(getpid(), GetParam());
+            takenTooEarly = taken;
+        };
+        EXPECT_TRUE(staple());
+        EXPECT_FALSE(takenTooEarly);
+        EXPECT_TRUE(taken);
+        EXPECT_EQ(test::readFile(path), "NEW");
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(BySignal, InterruptedReplacement, testing::Values(SIGHUP, SIGINT, SIGTERM),
+                         [](const auto& test) {
+                             switch (test.param) {
+                                 case SIGHUP:
+                                     return "SIGHUP";
+                                 case SIGINT:
+                                     return "SIGINT";
+                                 default:
+                                     return "SIGTERM";
+                             }
+                         });
 
 TEST_F(SafeReplacement, DeletingGoesTheSameRoadWithoutASource) {
     const MessageCapture output(kVerbosityVerbose);

@@ -250,12 +250,12 @@ TEST_F(FlatPackage, WhoseSizeCannotBeHadHasNoTicketAndIsReadNoFurther) {
     EXPECT_EQ(platform.files.count("handle.read"), 0U);
 }
 
-// Operation numbers of a walk: 0 opens, 1 seeks to the end, 2 and 3 seek to and read the last record, 4 and 5
-// its data.
-constexpr std::size_t kRecordSeek = 2;
-constexpr std::size_t kRecordRead = 3;
-constexpr std::size_t kDataSeek = 4;
-constexpr std::size_t kDataRead = 5;
+// Operation numbers of a walk: 0 notes the file's state, 1 opens, 2 seeks to the end, 3 and 4 seek to and
+// read the last record, 5 and 6 its data.
+constexpr std::size_t kRecordSeek = 3;
+constexpr std::size_t kRecordRead = 4;
+constexpr std::size_t kDataSeek = 5;
+constexpr std::size_t kDataRead = 6;
 
 TEST_F(FlatPackage, WhoseTicketCannotBeReadHasNone) {
     for (const std::size_t failing : {kDataSeek, kDataRead}) {

@@ -243,7 +243,8 @@ TEST_F(FlatPackageWriting, AFirstStapleThatFailsAtAnyOperationEndsWith73OrSuccee
         }
         if (succeeded) {
             EXPECT_EQ(contents(), PackageBuilder().terminator().ticket("NEW TICKET").build());
-            EXPECT_EQ(n, 8U) << "seekToEnd, write, position, write, write, position, synchronize, close";
+            EXPECT_EQ(n, 9U)
+                << "seekToEnd, reserve, write, position, write, write, position, synchronize, close";
         } else {
             EXPECT_EQ(file.appropriateExitCode(), 73) << n;
             EXPECT_THAT(lastLine, StartsWith("Fatal error while writing new ticket to ")) << n;
