@@ -167,6 +167,24 @@ TEST_F(Acceptance, ValidateDoesNotTouchTheArtefact) {
     EXPECT_FALSE(std::filesystem::exists(stapledPath()));
 }
 
+TEST_F(Acceptance, AnyOperationButStapleDoesNotTouchTheArtefact) {
+    for (const std::uint8_t operation : {std::uint8_t{0}, std::uint8_t{7}}) {
+        controller->setOperation(operation);
+        controller->writeDownloadedData(unsignedTicket({hash(0xAB)}), nullptr);
+        EXPECT_FALSE(std::filesystem::exists(stapledPath()));
+        EXPECT_EQ(file->appropriateExitCode(), 0);
+    }
+}
+
+TEST_F(Acceptance, ATicketThatIsKeptLeavesNoErrorWhetherItIsAcceptedOrNot) {
+    controller->setOperation(kOperationValidate);
+    for (const unsigned listed : {0xABU, 0x01U}) {
+        std::optional<Error> error = Error::osStatus(1);
+        controller->writeDownloadedData(unsignedTicket({hash(listed)}), &error);
+        EXPECT_FALSE(error.has_value());
+    }
+}
+
 TEST_F(Acceptance, StapleWritesTheTicketIntoTheArtefact) {
     controller->setOperation(kOperationStaple);
     const Data ticket = unsignedTicket({hash(0xAB)});

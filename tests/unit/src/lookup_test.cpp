@@ -148,6 +148,15 @@ TEST_F(Lookup, ValidateOfAFileWithoutATicketEndsWith65BeforeTheNetwork) {
     EXPECT_TRUE(run.platform.https.sessions.empty());
 }
 
+TEST_F(Lookup, AnyOperationButStapleChecksTheStapledTicketFirst) {
+    for (const std::uint8_t operation : {std::uint8_t{0}, std::uint8_t{7}}) {
+        const MessageCapture output(kVerbosityNormal);
+        EXPECT_FALSE(grab(operation));
+        EXPECT_EQ(output.text(), "App.app does not have a ticket stapled to it.\n");
+    }
+    EXPECT_TRUE(run.platform.https.sessions.empty());
+}
+
 TEST_F(Lookup, ValidateOfARevokedStapledTicketReportsItWith77) {
     run.staple(unsignedTicket({ControllerRun::fileHash()}, 1));
     const MessageCapture output(kVerbosityNormal);
