@@ -78,6 +78,8 @@ std::optional<URL> PWHashedFile::makeWorkingCopy() {
     const URL copy = directory->appendingPathComponent(fileURL_->lastPathComponent());
     if (const auto copied = platform_.files.copyItem(*fileURL_, copy); !copied) {
         NoisyLog("Could not copy backup to %@. %@", fileURL_->path(), copied.error());
+        // Nothing will be swapped from there, and nobody but us knows of it.
+        static_cast<void>(platform_.files.removeItem(*directory));
         return std::nullopt;
     }
     NoisyLog("Cloned %@ to %@", fileURL_->path(), copy.path());

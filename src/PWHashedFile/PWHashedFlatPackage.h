@@ -51,7 +51,6 @@ class PWHashedFlatPackage : public PWHashedFile {
     bool readSize(files::FileHandle& file);
     std::optional<Data> walkTrailers(files::FileHandle& file);
     std::optional<Data> readTicket(files::FileHandle& file, std::uint64_t start, std::uint32_t length);
-    void seekToTicket(files::FileHandle& file, std::uint64_t length);
     void writeTrailers(files::FileHandle& file, foundation::ByteView ticket, const std::string& targetName);
 
     std::uint64_t origEOL_ = 0;

@@ -55,33 +55,36 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
     return true;
 }
 
-// Where the ticket goes, with room behind it for `length` bytes.
-void PWHashedFlatPackage::seekToTicket(files::FileHandle& file, std::uint64_t length) {
-    if (ticketStart_ != 0 || hasTrailers_) {
-        file.seek(ticketStart_);
-        if (origEOL_ < ticketStart_ + length) file.reserve(length);
-        return;
-    }
-    file.seekToEnd();
-    file.reserve(kTrailerSize + length);
-    file.write(kTerminatorTrailer.bytes);
-    ticketStart_ = file.position();
-}
-
+// A write that is cut short must not leave a chain that ends in a terminator, or in a trailer of unknown
+// type, with no ticket in it: the next staple would write over the file from its first byte on. So the
+// terminator, without which a ticket is found just as well, comes last; and trailers that stood behind the
+// old ticket are made unrecognisable, by zeros behind them, before the new ones are written over them.
 void PWHashedFlatPackage::writeTrailers(files::FileHandle& file, ByteView ticket,
                                         const std::string& targetName) {
+    const bool isFirst = ticketStart_ == 0 && !hasTrailers_;
+    const std::uint64_t start = isFirst ? file.seekToEnd() : file.seek(ticketStart_);
+    if (isFirst) ticketStart_ = start + kTrailerSize;
+
     const std::uint64_t appended = dataToAppend_ ? dataToAppend_->size() : 0;
-    seekToTicket(file, appended + (ticket.empty() ? 0 : ticket.size() + kTrailerSize));
+    const std::uint64_t written = appended + (ticket.empty() ? 0 : ticket.size() + kTrailerSize);
+    if (origEOL_ < ticketStart_ + written) file.reserve(ticketStart_ + written - start);
+    std::uint64_t length = origEOL_;
+    if (dataToAppend_) file.truncate(length += kTrailerSize);
+
+    if (isFirst) file.seek(ticketStart_);
     if (dataToAppend_) file.write(*dataToAppend_);
     if (!ticket.empty()) {
         file.write(ticket);
         file.write(ticketTrailer(static_cast<std::uint32_t>(ticket.size())).bytes);
     }
     const std::uint64_t end = file.position();
-    if (origEOL_ > end) {
-        NoisyLog("Truncating %@ from to %llu bytes to %llu bytes.", targetName, origEOL_, end);
-        file.truncate(end);
+    if (isFirst) {
+        file.seek(start);
+        file.write(kTerminatorTrailer.bytes);
     }
+    if (origEOL_ > end)
+        NoisyLog("Truncating %@ from to %llu bytes to %llu bytes.", targetName, origEOL_, end);
+    if (length > end) file.truncate(end);
     file.synchronize();
     file.close();
 }

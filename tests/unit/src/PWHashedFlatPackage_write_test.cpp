@@ -243,11 +243,39 @@ TEST_F(FlatPackageWriting, AFirstStapleThatFailsAtAnyOperationEndsWith73OrSuccee
         }
         if (succeeded) {
             EXPECT_EQ(contents(), PackageBuilder().terminator().ticket("NEW TICKET").build());
-            EXPECT_EQ(n, 9U)
-                << "seekToEnd, reserve, write, position, write, write, position, synchronize, close";
+            EXPECT_EQ(n, 10U)
+                << "seekToEnd, reserve, seek, write, write, position, seek, write, synchronize, close";
         } else {
             EXPECT_EQ(file.appropriateExitCode(), 73) << n;
             EXPECT_THAT(lastLine, StartsWith("Fatal error while writing new ticket to ")) << n;
+        }
+    }
+}
+
+// A chain that has trailers but no ticket is written over from the file's first byte on. Whatever operation is the
+// last one to work, what is left behind must not look like one.
+TEST_F(FlatPackageWriting, CutShortAnywhereLeavesAFileThatCanBeStapledAgain) {
+    const PackageBuilder unstapled;
+    const PackageBuilder followed = PackageBuilder().terminator().ticket("AN OLD TICKET").unknown("unknown");
+    for (const PackageBuilder& before : {unstapled, followed}) {
+        bool succeeded = false;
+        for (std::size_t n = 0; !succeeded; ++n) {
+            ASSERT_LT(n, 20U);
+            put(before);
+            test::TestPlatform failing;
+            failing.files.answerCloning(false);
+            PWHashedFlatPackage file{url, failing.services()};
+            file.ticketData();
+            // Behind the question of cloning and the read of the ticket.
+            const std::size_t opened = failing.files.operations().size() + 4;
+            for (std::size_t i = n; i < 20; ++i) failing.files.failOperation(opened + i, EIO);
+            const MessageCapture output(kVerbosityQuiet);
+            succeeded = file.writeNewTicketDataFromURL(source, nullptr);
+
+            PWHashedFlatPackage again{url, platform.services()};
+            EXPECT_TRUE(again.writeNewTicketDataFromURL(source, nullptr)) << n;
+            EXPECT_TRUE(contents().starts_with(unstapled.build())) << n;
+            EXPECT_EQ(PWHashedFlatPackage(url, platform.services()).ticketData(), toData("NEW TICKET")) << n;
         }
     }
 }
