@@ -1,6 +1,6 @@
 // Whatever call fails: the error comes out, the old file or the new one is there, nothing half made stays,
 // and no file is left open.
-#include "failing_calls.h"
+#include "support/failing_calls.h"
 
 #include <cerrno>
 #include <filesystem>

@@ -1,10 +1,12 @@
-#include "failing_calls.h"
+#include "support/failing_calls.h"
 
 #include <dirent.h>
 #include <fcntl.h>
+#include <sys/file.h>
 #include <sys/ioctl.h>
 #include <sys/stat.h>
 #include <sys/types.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -21,10 +23,27 @@ constexpr std::size_t kShortCount = 3;
 
 // The calls that POSIX lets a signal interrupt.
 const std::set<std::string>& interruptible() {
-    static const std::set<std::string> calls{"open",   "openat", "mkostemp", "close",          "read",
-                                             "write",  "pread",  "pwrite",   "fsync",          "ftruncate",
-                                             "fchmod", "fchown", "ioctl",    "copy_file_range"};
+    static const std::set<std::string> calls{
+        "open",  "openat",    "mkostemp", "close",  "read",  "write",           "pread", "pwrite",
+        "fsync", "ftruncate", "fchmod",   "fchown", "ioctl", "copy_file_range", "flock", "fallocate"};
     return calls;
+}
+
+// The calls that may move fewer bytes than they were asked to.
+const std::set<std::string>& moving() {
+    static const std::set<std::string> calls{"read", "write", "pread", "pwrite", "copy_file_range"};
+    return calls;
+}
+
+// The calls that a volume without room, or out of order, refuses.
+const std::set<std::string>& storing() {
+    static const std::set<std::string> calls{"write", "pwrite", "copy_file_range", "fallocate", "ftruncate",
+                                             "fsync", "ioctl"};
+    return calls;
+}
+
+bool isStandardStream(int file) {
+    return file <= STDERR_FILENO;
 }
 
 bool fails(const char* name) {
@@ -47,6 +66,12 @@ Trouble::~Trouble() {
 
 Trouble Trouble::atCall(std::size_t number, int reason) {
     return {Kind::atCall, number, {}, reason};
+}
+Trouble Trouble::shortAtCall(std::size_t number) {
+    return {Kind::shortAtCall, number, {}, 0};
+}
+Trouble Trouble::fromCallOn(std::size_t number, int reason) {
+    return {Kind::fromCallOn, number, {}, reason};
 }
 Trouble Trouble::atEvery(std::set<std::string> names, int reason) {
     return {Kind::atEvery, 0, std::move(names), reason};
@@ -71,6 +96,13 @@ bool Trouble::fails(const std::string& name) {
         case Kind::atCall:
             failing = number == number_;
             break;
+        case Kind::shortAtCall:
+            if (number == number_) failedCall_ = name;
+            break;
+        case Kind::fromCallOn:
+            if (number == number_) failedCall_ = name;
+            failing = number >= number_ && storing().contains(name) && !isShort();
+            break;
         case Kind::atEvery:
             failing = names_.contains(name);
             break;
@@ -88,6 +120,12 @@ bool Trouble::fails(const std::string& name) {
     return true;
 }
 
+bool Trouble::isShort() const noexcept {
+    if (kind_ == Kind::shortCounts) return true;
+    return (kind_ == Kind::shortAtCall || kind_ == Kind::fromCallOn) && calls_ == number_ + 1 &&
+           moving().contains(failedCall_);
+}
+
 void Trouble::noteOpening(int flags) {
     if ((flags & O_CLOEXEC) == 0) ++inheritable_;
 }
@@ -98,6 +136,7 @@ void Trouble::noteOpening(int flags) {
 // NOLINTBEGIN: reserved and variadic names that are not ours to choose
 using pinwell::test::current;
 using pinwell::test::fails;
+using pinwell::test::isStandardStream;
 using pinwell::test::shortened;
 
 namespace {
@@ -119,6 +158,10 @@ extern "C" {
         return fails(#call) ? failure : __real_##call arguments;   \
     }
 
+PINWELL_WRAP(int, -1, fallocate, (int file, int mode, off_t at, off_t length), (file, mode, at, length))
+PINWELL_WRAP(int, -1, flock, (int file, int operation), (file, operation))
+PINWELL_WRAP(int, -1, rmdir, (const char* path), (path))
+PINWELL_WRAP(int, -1, unlink, (const char* path), (path))
 PINWELL_WRAP(int, -1, fchmod, (int file, mode_t mode), (file, mode))
 PINWELL_WRAP(int, -1, fchown, (int file, uid_t user, gid_t group), (file, user, group))
 PINWELL_WRAP(DIR*, nullptr, fdopendir, (int file), (file))
@@ -139,8 +182,6 @@ PINWELL_WRAP(dirent*, nullptr, readdir, (DIR * stream), (stream))
 PINWELL_WRAP(ssize_t, -1, readlink, (const char* path, char* target, size_t size), (path, target, size))
 PINWELL_WRAP(int, -1, rename, (const char* from, const char* to), (from, to))
 PINWELL_WRAP(int, -1, unlinkat, (int directory, const char* name, int flags), (directory, name, flags))
-PINWELL_WRAP(ssize_t, -1, read, (int file, void* bytes, size_t count), (file, bytes, shortened(count)))
-PINWELL_WRAP(ssize_t, -1, write, (int file, const void* bytes, size_t count), (file, bytes, shortened(count)))
 PINWELL_WRAP(ssize_t, -1, pread, (int file, void* bytes, size_t count, off_t at),
              (file, bytes, shortened(count), at))
 PINWELL_WRAP(ssize_t, -1, pwrite, (int file, const void* bytes, size_t count, off_t at),
@@ -150,6 +191,20 @@ PINWELL_WRAP(ssize_t, -1, copy_file_range,
              (from, in, to, out, shortened(count), flags))
 
 #undef PINWELL_WRAP
+
+ssize_t __real_read(int file, void* bytes, size_t count);
+ssize_t __wrap_read(int file, void* bytes, size_t count);
+ssize_t __wrap_read(int file, void* bytes, size_t count) {
+    if (isStandardStream(file)) return __real_read(file, bytes, count);
+    return fails("read") ? -1 : __real_read(file, bytes, shortened(count));
+}
+
+ssize_t __real_write(int file, const void* bytes, size_t count);
+ssize_t __wrap_write(int file, const void* bytes, size_t count);
+ssize_t __wrap_write(int file, const void* bytes, size_t count) {
+    if (isStandardStream(file)) return __real_write(file, bytes, count);
+    return fails("write") ? -1 : __real_write(file, bytes, shortened(count));
+}
 
 // Closes in any case, as the kernel does.
 int __real_close(int file);

@@ -1,0 +1,73 @@
+// Trouble with the system's file calls, made on purpose. A test program that links to the target
+// failing_calls is linked so that the calls named in CMakeLists.txt come through here (ld's --wrap); outside
+// a Trouble's life, and on other threads, they pass on. So do reads and writes of the standard streams, which
+// are no files.
+//
+// This is the seam for faults, rather than a library that is preloaded into the tool or a file manager that
+// fails: everything under test runs in the test's own process, so a run costs a millisecond and a test can
+// afford one for every call and every errno; it is counted in the calls that the kernel sees, those of the
+// readers of archives and signatures included, which do not come through the file service; and the code under
+// test is compiled as it is shipped.
+#pragma once
+
+#include <cstddef>
+#include <set>
+#include <string>
+#include <string_view>
+
+namespace pinwell::test {
+
+class Trouble {
+  public:
+    /// The call of that number, counted from 0, fails with that errno.
+    static Trouble atCall(std::size_t number, int reason);
+
+    /// The call of that number moves three bytes at most, if it is a read, a write or a copy.
+    static Trouble shortAtCall(std::size_t number);
+
+    /// The volume is full (or broken, by what `reason` says) when the call of that number is made: if that
+    /// moves bytes, three arrive, and from there on nothing more can be written, made durable, cut or
+    /// extended.
+    static Trouble fromCallOn(std::size_t number, int reason);
+
+    /// Every call of these names fails with that errno.
+    static Trouble atEvery(std::set<std::string> names, int reason);
+
+    /// Every call that a signal can interrupt is interrupted the first time, and works when it is made again.
+    static Trouble interruptions();
+
+    /// All reads, writes and copies move three bytes at most.
+    static Trouble shortCounts();
+
+    /// All works; open files without close-on-exec are counted.
+    static Trouble none();
+
+    ~Trouble();
+    Trouble(const Trouble&) = delete;
+    Trouble& operator=(const Trouble&) = delete;
+
+    /// The last call that was made to fail, or be short; empty when there was none.
+    const std::string& failedCall() const noexcept { return failedCall_; }
+    std::size_t callCount() const noexcept { return calls_; }
+    std::size_t openedWithoutCloseOnExec() const noexcept { return inheritable_; }
+
+    // For the calls themselves.
+    bool fails(const std::string& name);
+    bool isShort() const noexcept;
+    void noteOpening(int flags);
+
+  private:
+    enum class Kind { none, atCall, shortAtCall, fromCallOn, atEvery, interruptions, shortCounts };
+    Trouble(Kind kind, std::size_t number, std::set<std::string> names, int reason);
+
+    Kind kind_;
+    std::size_t number_;
+    std::set<std::string> names_;
+    int reason_;
+    std::size_t calls_ = 0;
+    std::size_t inheritable_ = 0;
+    std::string failedCall_;
+    std::string interrupted_;
+};
+
+}  // namespace pinwell::test

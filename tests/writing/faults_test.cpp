@@ -1,0 +1,356 @@
+// Every way to write an artefact, with each of its file calls failing in each way: what is on the disk
+// afterwards, and what the tool says.
+//
+// An artefact that is replaced by a rewritten clone is the old one or the new one. One that is written in
+// place has all its data, whatever has become of its tail, and what it takes to put the tail right lies on
+// the disk.
+#include <cerrno>
+#include <filesystem>
+#include <functional>
+#include <iostream>
+
+#include "foundation/format.h"
+#include "stapling.h"
+#include "support/environment.h"
+#include "support/executable_image_builder.h"
+#include "support/failing_calls.h"
+#include "support/package_builder.h"
+#include "support/process.h"
+#include "support/volume.h"
+
+#include <gmock/gmock.h>
+
+namespace pinwell::test {
+namespace {
+
+using testing::AnyOf;
+using testing::Contains;
+using testing::IsEmpty;
+using testing::Not;
+
+// What is written, as one file.
+struct Subject {
+    std::string name;
+    std::string path;  // what the tool is given
+    std::string file;  // what is written: the file itself, or a bundle's ticket
+    std::string data;  // the part of the file that is not the ticket's; never written
+    Data hash;
+    std::function<std::optional<std::string>(const std::optional<Data>&)> contentsWith;  // nothing: no file
+    bool isBundle = false;
+    bool isImage = false;
+};
+
+Subject bundleIn(const std::string& directory) {
+    const Data codeDirectory = CodeDirectoryBuilder().covers(2, emptyRequirements()).build();
+    const std::string path = directory + "/Sample.app";
+    BundleBuilder()
+        .executable(
+            ExecutableImageBuilder().signature(SuperBlobBuilder::adHoc(codeDirectory).build()).build())
+        .write(path);
+    return {.name = "bundle",
+            .path = path,
+            .file = path + "/Contents/CodeResources",
+            .data = {},
+            .hash = codeHashOf(2, codeDirectory),
+            .contentsWith = [](const std::optional<Data>& ticket) -> std::optional<std::string> {
+                if (!ticket) return std::nullopt;
+                return foundation::toString(*ticket);
+            },
+            .isBundle = true};
+}
+
+Subject fileIn(const std::string& directory, const Artefact& artefact, const std::string& name,
+               const Data& data) {
+    const std::string path = directory + "/" + artefact.name;
+    const bool isImage = artefact.name.ends_with(".dmg");
+    return {.name = name,
+            .path = path,
+            .file = path,
+            .data = isImage ? foundation::toString(data) : artefact.contents,
+            .hash = artefact.hash,
+            .contentsWith = [artefact](const std::optional<Data>& ticket) -> std::optional<std::string> {
+                return ticket ? artefact.stapledWith(*ticket) : artefact.contents;
+            },
+            .isImage = isImage};
+}
+
+struct Job {
+    std::string name;
+    std::optional<Data> before;
+    std::optional<Data> after;  // nothing: the ticket is deleted
+};
+
+std::vector<Job> jobsFor(const Subject& subject) {
+    const Data shorter = unsignedTicket({subject.hash});
+    const Data longer = unsignedTicket({hashOf(1), hashOf(2), subject.hash});
+    std::vector<Job> jobs{{"staple", std::nullopt, longer},
+                          {"restaple shorter", longer, shorter},
+                          {"restaple longer", shorter, longer}};
+    if (!subject.isBundle) jobs.push_back({"delete", longer, std::nullopt});
+    return jobs;
+}
+
+struct Fault {
+    std::string name;
+    std::function<Trouble(std::size_t)> at;
+};
+
+const std::vector<Fault>& faults() {
+    static const auto failing = [](const char* name, int reason) {
+        return Fault{name, [reason](std::size_t number) { return Trouble::atCall(number, reason); }};
+    };
+    static const std::vector<Fault> all{
+        failing("EIO", EIO),
+        failing("ENOSPC", ENOSPC),
+        failing("EROFS", EROFS),
+        failing("EDQUOT", EDQUOT),
+        failing("EACCES", EACCES),
+        failing("EINTR", EINTR),
+        {"a short count", [](std::size_t number) { return Trouble::shortAtCall(number); }},
+        {"ENOSPC from then on", [](std::size_t number) { return Trouble::fromCallOn(number, ENOSPC); }},
+        {"EIO from then on", [](std::size_t number) { return Trouble::fromCallOn(number, EIO); }},
+    };
+    return all;
+}
+
+std::optional<std::string> contentsOf(const std::string& path) {
+    if (!std::filesystem::exists(std::filesystem::symlink_status(path))) return std::nullopt;
+    return readFile(path);
+}
+
+std::vector<std::string> pathsIn(const std::string& directory, std::string_view ending) {
+    std::vector<std::string> paths;
+    for (const auto& entry : std::filesystem::directory_iterator(directory))
+        if (entry.path().native().ends_with(ending)) paths.push_back(entry.path());
+    return paths;
+}
+
+// A failed write is 73, and one of these says why.
+bool saysWhyItWasNotWritten(const Outcome& outcome) {
+    for (const char* beginning :
+         {"Fatal error while ", "All that work and I can't open ", "Could not create file handle to ",
+          "Cannot add a new ticket to ", "Cannot delete an existing ticket in ", "Could not write ticket to ",
+          "Although we wrote the ticket, ", "Could not remove existing ticket from ",
+          "Could not save ticket to "})
+        if (outcome.says(beginning)) return true;
+    for (const std::string& line : outcome.lines)
+        if (line.ends_with(" has changed since it was read. Nothing was written to it.") ||
+            line.find(" will not replace the compatibility symlink at ") != std::string::npos)
+            return true;
+    return false;
+}
+
+constexpr const char* kSwapFailed = "Could not replace ";
+
+struct Tally {
+    std::size_t points = 0;  // calls of the runs, each failed in every way
+    std::size_t runs = 0;
+    std::size_t kept = 0;      // the artefact was the old one afterwards
+    std::size_t written = 0;   // the new one
+    std::size_t appended = 0;  // the old one with a second chain behind it
+    std::size_t repaired = 0;  // in between, and was put right
+};
+
+class WriteFaults : public testing::TestWithParam<const char*> {
+  protected:
+    // Stands where artefacts go, and says how they are written there.
+    static std::string fileSystem() { return GetParam(); }
+    static bool clones() { return fileSystem() == "xfs"; }
+
+    WriteFaults() {
+        if (!clones() && volume_.missing()) place_ = fallback_.path();  // /tmp will do, if slower
+        if (!scratch_.missing()) temporary_ = scratch_.path();
+    }
+
+    std::optional<std::string> missing() const {
+        if (clones() && volume_.missing()) return volume_.missing();
+        writeFile(place_ + "/probe", std::string_view("probe"));
+        const auto manager = files::makeLocalFileManager(plainTypeNaming);
+        const auto answer =
+            manager->volumeSupportsCloning(foundation::URL::fileURLWithPath(place_ + "/probe"));
+        std::filesystem::remove(place_ + "/probe");
+        if (!answer || *answer != clones()) return "no volume here to write in place on";
+        return std::nullopt;
+    }
+
+    Tally failEverything(const Subject& subject) {
+        Tally tally;
+        for (const Job& job : jobsFor(subject)) {
+            for (const Fault& fault : faults()) {
+                std::size_t number = 0;
+                while (failOnce(subject, job, fault, number, tally)) ++number;
+                EXPECT_GT(number, 20U);
+                if (&fault == &faults().front()) tally.points += number;
+                if (HasFailure()) return tally;
+            }
+        }
+        return tally;
+    }
+
+  private:
+    // False when the run has fewer calls.
+    bool failOnce(const Subject& subject, const Job& job, const Fault& fault, std::size_t number,
+                  Tally& tally) {
+        prepare(subject, job.before);
+        Stapling stapling(temporary_);
+        Outcome outcome;
+        std::string failed;
+        {
+            const Trouble trouble = fault.at(number);
+            outcome = job.after ? stapling.staple(subject.path, *job.after) : stapling.erase(subject.path);
+            failed = trouble.failedCall();
+        }
+        SCOPED_TRACE(foundation::format("%@ of a %@, %@ at call %lu, %@\n%@", job.name, subject.name,
+                                        fault.name, number, failed, testing::PrintToString(outcome)));
+        ++tally.runs;
+        check(subject, job, outcome, tally);
+        if (outcome.status == kExitOK && !outcome.says(kSwapFailed) && failed != "rmdir" &&
+            failed != "unlinkat") {
+            EXPECT_THAT(pathsIn(place_, ""), Not(Contains(testing::HasSubstr(".pinwell-"))));
+        }
+        return !failed.empty();
+    }
+
+    void prepare(const Subject& subject, const std::optional<Data>& ticket) const {
+        if (!subject.isBundle) {
+            for (const auto& entry : std::filesystem::directory_iterator(place_)) remove_all(entry.path());
+        }
+        if (temporary_ != place_)
+            for (const auto& entry : std::filesystem::directory_iterator(temporary_))
+                remove_all(entry.path());
+        std::filesystem::remove_all(subject.file);
+        if (const auto contents = subject.contentsWith(ticket)) writeFile(subject.file, *contents);
+    }
+
+    void check(const Subject& subject, const Job& job, const Outcome& outcome, Tally& tally) {
+        const auto before = subject.contentsWith(job.before);
+        const auto after = afterwards(subject, job);
+        const auto now = contentsOf(subject.file);
+        if (outcome.status == kExitOK) {
+            // A swap that failed leaves the file that was there, as a rule, which may well carry a valid
+            // ticket; a chain that could not be read stays, and gets another behind it.
+            EXPECT_TRUE(now == after || (now == before && outcome.says(kSwapFailed)) ||
+                        isAppended(job, before, now));
+        } else {
+            EXPECT_THAT(outcome.status, AnyOf(kExitDataError, kExitNoInput, kExitNoHost, kExitCannotCreate));
+            EXPECT_TRUE(outcome.status != kExitCannotCreate || saysWhyItWasNotWritten(outcome));
+            if (job.after && outcome.says("Downloaded ticket has been stored at")) {
+                EXPECT_EQ(
+                    outcome.lines.back(),
+                    foundation::format("The staple and validate action failed! Error %d.", outcome.status));
+            }
+        }
+        if (now == after) {
+            ++tally.written;
+        } else if (now == before) {
+            ++tally.kept;
+        } else if (outcome.status == kExitOK) {
+            ++tally.appended;
+        } else {
+            EXPECT_EQ(outcome.status, kExitCannotCreate);
+            repair(subject, job, now);
+            ++tally.repaired;
+        }
+    }
+
+    static bool isAppended(const Job& job, const std::optional<std::string>& before,
+                           const std::optional<std::string>& now) {
+        if (!job.before || !job.after || !before || !now) return false;
+        const auto chain = PackageBuilder().archive({}).terminator().ticket(foundation::toString(*job.after));
+        return *now == *before + chain.build();
+    }
+
+    // An unsigned image keeps its only blob.
+    static std::optional<std::string> afterwards(const Subject& subject, const Job& job) {
+        if (!job.after && subject.name == "unsigned image") return subject.contentsWith(job.before);
+        auto contents = subject.contentsWith(job.after);
+        if (!job.after && !subject.isImage && contents) *contents += terminator();
+        return contents;
+    }
+    static std::string terminator() { return {"t8lr\1\0\1\0\0\0\0\0\0\0\0\0", 16}; }
+
+    void repair(const Subject& subject, const Job& job, const std::optional<std::string>& now) {
+        if (subject.isBundle) {
+            // Known: between the removal of the old ticket and the copy of the new one there is none.
+            EXPECT_EQ(now, std::nullopt);
+            return;
+        }
+        EXPECT_FALSE(clones()) << "neither the old file nor the new one";
+        ASSERT_TRUE(now.has_value());
+        EXPECT_TRUE(now->starts_with(subject.data));
+        if (subject.isImage) {
+            const auto copies = pathsIn(temporary_, ".dmgData");
+            ASSERT_EQ(copies.size(), 1U);
+            const ProcessResult restored = runProcess({.executable = RESTORE_IMAGE,
+                                                       .arguments = {subject.file, copies.front()},
+                                                       .environment = {{"PATH", "/usr/bin:/bin"}}});
+            EXPECT_EQ(restored.exitStatus, 0) << restored.errors;
+            EXPECT_TRUE(readFile(subject.file) == afterwards(subject, job));
+            return;
+        }
+        // A package's tail is the ticket and nothing else, which is saved: the same run, once more.
+        if (job.after) {
+            EXPECT_EQ(readFile(temporary_ + "/REQUEST.ticket"), foundation::toString(*job.after));
+        }
+        const Data ticket = job.after.value_or(unsignedTicket({subject.hash}));
+        EXPECT_EQ(Stapling(temporary_).staple(subject.path, ticket).status, kExitOK);
+        EXPECT_TRUE(readFile(subject.file).starts_with(subject.data));
+    }
+
+  private:
+    // Volumes whose backing files are in memory: what is flushed is flushed at once.
+    std::optional<ScopedVariable> inMemory_ =
+        std::filesystem::is_directory("/dev/shm")
+            ? std::optional<ScopedVariable>(std::in_place, "TMPDIR", "/dev/shm")
+            : std::nullopt;
+
+  protected:
+    Volume volume_{fileSystem()};
+    Volume scratch_{"tmpfs"};
+    TemporaryDirectory fallback_;
+    TemporaryDirectory temporaryFallback_;
+    std::string place_ = volume_.path();
+    std::string temporary_ = temporaryFallback_.path();
+
+    void run(const std::function<Subject(const std::string&)>& make) {
+        if (const auto reason = missing()) GTEST_SKIP() << *reason;
+        const Tally tally = failEverything(make(place_));
+        RecordProperty("FaultPoints", std::to_string(tally.points));
+        RecordProperty("Runs", std::to_string(tally.runs));
+        std::cout << "fault points: " << tally.points << " calls, " << tally.runs
+                  << " runs; the artefact was kept in " << tally.kept << ", written in " << tally.written
+                  << ", appended to in " << tally.appended << ", put right in " << tally.repaired << "\n";
+    }
+};
+
+const Data& sampleData() {
+    static const Data data = irregularData(10'000);
+    return data;
+}
+
+TEST_P(WriteFaults, LeaveABundlesTicketWholeOrNone) {
+    run(bundleIn);
+}
+
+TEST_P(WriteFaults, LoseNoSignedImage) {
+    run([](const std::string& place) {
+        return fileIn(place, signedImage(sampleData()), "signed image", sampleData());
+    });
+}
+
+TEST_P(WriteFaults, LoseNoUnsignedImage) {
+    run([](const std::string& place) {
+        return fileIn(place, unsignedImage(sampleData()), "unsigned image", sampleData());
+    });
+}
+
+TEST_P(WriteFaults, LoseNoPackage) {
+    run([](const std::string& place) { return fileIn(place, signedPackage(sampleData()), "package", {}); });
+}
+
+INSTANTIATE_TEST_SUITE_P(OnVolumes, WriteFaults, testing::Values("tmpfs", "xfs"), [](const auto& volume) {
+    return std::string(volume.param) == "xfs" ? "ByClone" : "InPlace";
+});
+
+}  // namespace
+}  // namespace pinwell::test
