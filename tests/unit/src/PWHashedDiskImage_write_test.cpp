@@ -100,6 +100,17 @@ TEST_F(DiskImageWriting, AppendsTheTicketToASignedImagesBlobsWhichMoveBy8) {
     EXPECT_FALSE(printedTruncation());
 }
 
+// The superblob then stands at offset 0, which in a trailer means that there is none: the read-back of a
+// staple is what finds out.
+TEST_F(DiskImageWriting, OfATrailerAloneSucceedsThoughTheTicketIsNotFoundAgain) {
+    ASSERT_TRUE(write(DiskImageBuilder().data({}), "TICKET"));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().data({}).superblob(stapled("TICKET"))));
+    EXPECT_EQ(exitCode, 0);
+    auto image = open();
+    EXPECT_EQ(image.appropriateExitCode(), 0);
+    EXPECT_EQ(image.ticketData(), std::nullopt);
+}
+
 TEST_F(DiskImageWriting, TakesATicketOf1Byte) {
     ASSERT_TRUE(write(DiskImageBuilder(), "T"));
     EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(stapled("T"))));
