@@ -1,6 +1,7 @@
 #include "files/file_handle.h"
 
 #include <fcntl.h>
+#include <sys/resource.h>
 #include <unistd.h>
 
 #include <limits>
@@ -10,6 +11,13 @@
 
 namespace pinwell::files {
 namespace {
+
+bool exceedsFileSizeLimit(off_t from, off_t length) {
+    rlimit limit{};
+    if (getrlimit(RLIMIT_FSIZE, &limit) != 0 || limit.rlim_cur == RLIM_INFINITY) return false;
+    const auto end = static_cast<rlim_t>(from) + static_cast<rlim_t>(length);  // two that fit 63 bits
+    return end > limit.rlim_cur;
+}
 
 class LocalFileHandle final : public FileHandle {
   public:
@@ -29,9 +37,11 @@ class LocalFileHandle final : public FileHandle {
 
     void reserve(std::uint64_t length) override {
         const off_t size = offset("reserve room in", length);
-        const auto from = offset("reserve room in", position());
-        if (uninterrupted([&] { return fallocate(file_.number(), FALLOC_FL_KEEP_SIZE, from, size); }) == 0)
-            return;
+        const off_t from = offset("reserve room in", position());
+        // fallocate, which leaves the file as long as it is, does not ask for this one.
+        if (exceedsFileSizeLimit(from, size)) fail("reserve room in", Error::posix(EFBIG, file_.path));
+        const int mode = FALLOC_FL_KEEP_SIZE;
+        if (uninterrupted([&] { return fallocate(file_.number(), mode, from, size); }) == 0) return;
         // No promise to be had here: the writing itself will tell.
         if (errno == EOPNOTSUPP || errno == ENOSYS) return;
         fail("reserve room in", lastError(file_.path));

@@ -178,8 +178,8 @@ TEST_F(FailingCalls, InAReplacementLeaveTheOldFileOrTheNewOne) {
                 EXPECT_TRUE(isError) << failed;
                 EXPECT_EQ(readFile(copy.path()), "new") << failed;
             } else {
-                EXPECT_THAT(namesIn(directory.path()), ElementsAre("original")) << failed;
-                EXPECT_THAT(failed, AnyOf("", "fsync", "close"));
+                EXPECT_EQ(namesIn(directory.path()).size(), failed == "rmdir" ? 2U : 1U) << failed;
+                EXPECT_THAT(failed, AnyOf("", "fsync", "close", "rmdir"));
             }
         });
     EXPECT_THAT((std::set<std::string>{"lstat", "open", "fstat", "fchmod", "fchown", "flistxattr",

@@ -6,6 +6,7 @@
 #include <limits>
 
 #include "fixture.h"
+#include "support/volume.h"
 
 namespace pinwell::test {
 namespace {
@@ -141,6 +142,40 @@ TEST_F(Handle, SaysWhyAWriteFailed) {
     setrlimit(RLIMIT_FSIZE, &before);
     std::signal(SIGXFSZ, SIG_DFL);
     EXPECT_EQ(reason, "Cannot write to " + path("file") + ": File too large");
+}
+
+TEST_F(Handle, ReservesRoomWithoutMakingTheFileLonger) {
+    const auto handle = updating("contents");
+    handle->seekToEnd();
+    handle->reserve(100'000);
+    EXPECT_EQ(readFile(path("file")), "contents");
+    EXPECT_EQ(handle->position(), 8U);
+    handle->write(asBytes("!"));
+    EXPECT_EQ(readFile(path("file")), "contents!");
+}
+
+TEST_F(Handle, ReservesNoRoomOnAFullVolume) {
+    const Volume volume("tmpfs");
+    if (volume.missing()) GTEST_SKIP() << *volume.missing();
+    writeFile(volume / "file", "contents");
+    const auto handle = manager->openForUpdating(files::URL::fileURLWithPath(volume / "file"));
+    ASSERT_THAT(handle, Succeeds());
+    EXPECT_EQ(reasonOf([&] { (*handle)->reserve(2U << 20U); }),
+              "Cannot reserve room in " + (volume / "file") + ": No space left on device");
+    EXPECT_EQ(readFile(volume / "file"), "contents");
+}
+
+TEST_F(Handle, ReservesNoRoomOverTheFileSizeLimit) {
+    const auto handle = updating("contents");
+    rlimit before{};
+    getrlimit(RLIMIT_FSIZE, &before);
+    const rlimit small{4096, before.rlim_max};
+    setrlimit(RLIMIT_FSIZE, &small);
+    handle->reserve(4096);
+    handle->seek(1);
+    const std::string reason = reasonOf([&] { handle->reserve(4096); });
+    setrlimit(RLIMIT_FSIZE, &before);
+    EXPECT_EQ(reason, "Cannot reserve room in " + path("file") + ": File too large");
 }
 
 TEST_F(Handle, ClosesOnceAndIsOfNoUseAfterwards) {
