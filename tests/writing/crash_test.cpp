@@ -54,47 +54,53 @@ class Crash : InMemory, public EndToEndTest, public testing::WithParamInterface<
         return volume_.missing() ? volume_.missing() : tracingMissing();
     }
 
-    /// Puts everything as it was before a run.
-    using Preparation = std::function<void()>;
-    /// What is on the disk where the artefact is; nothing when there is no file.
-    using Look = std::function<std::optional<std::string>()>;
-    /// Puts right what is neither the old one nor the new one.
-    using Repair = std::function<void()>;
+    struct Scene {
+        std::string path;  // the artefact's
+        Data ticket;       // that it gets
+        /// Puts everything as it was before a run.
+        std::function<void()> prepare;
+        /// What is on the disk where the ticket goes; nothing when there is no file.
+        std::function<std::optional<std::string>()> look;
+        std::string after;
+        /// Puts right what is neither the old one nor the new one.
+        std::function<void()> repair;
+    };
 
-    void interruptEverywhere(const std::string& path, const Preparation& prepare, const Look& look,
-                             const std::optional<std::string>& after, const Repair& repair, int signal) {
+    void interruptEverywhere(const Scene& scene, int signal) {
         const TracedCalls calls{.directory = volume_.path(),
                                 .changesOnly = std::getenv("PINWELL_EVERY_CALL") == nullptr};
         Tally tally;
         for (std::size_t number = 0;; ++number) {
+            if (number % kRunsPerServer == 0) serveAfresh(scene.ticket);
             empty(volume_ / "tmp");
-            prepare();
-            const auto before = look();
-            const TracedRun run = interruptRun(command({"staple", path}), calls, number, signal);
+            scene.prepare();
+            const auto before = scene.look();
+            const TracedRun run = interruptRun(command({"staple", scene.path}), calls, number, signal);
             if (!run.interruptedAt) {
                 EXPECT_EQ(run.exitStatus, 0);
-                EXPECT_TRUE(look() == after);
+                EXPECT_TRUE(scene.look() == scene.after);
                 break;
             }
             SCOPED_TRACE(foundation::format("at call %lu, %@", number, *run.interruptedAt));
             EXPECT_EQ(run.signal, signal);
             ++tally.points;
             tally.calls.insert(*run.interruptedAt);
-            const auto now = look();
-            if (now == after) {
+            const auto now = scene.look();
+            if (now == scene.after) {
                 ++tally.written;
             } else if (now == before) {
                 ++tally.kept;
             } else {
                 EXPECT_EQ(signal, SIGKILL) << "a signal that can wait has not waited";
-                EXPECT_FALSE(clones() && path.ends_with(".dmg")) << "neither the old file nor the new one";
-                repair();
+                EXPECT_FALSE(clones() && scene.path.ends_with(".dmg"))
+                    << "neither the old file nor the new one";
+                scene.repair();
                 ++tally.repaired;
             }
-            EXPECT_EQ(pinwell({"staple", path}).exitStatus, 0);
-            EXPECT_TRUE(look() == after || path.ends_with(".pkg"));
-            if (look() != after) {
-                EXPECT_EQ(pinwell({"validate", path}).exitStatus, 0);
+            EXPECT_EQ(pinwell({"staple", scene.path}).exitStatus, 0);
+            if (scene.look() != scene.after) {
+                EXPECT_TRUE(scene.path.ends_with(".pkg")) << "whose chains may stand behind remains";
+                EXPECT_EQ(pinwell({"validate", scene.path}).exitStatus, 0);
             }
             if (HasFailure()) break;
         }
@@ -110,19 +116,31 @@ class Crash : InMemory, public EndToEndTest, public testing::WithParamInterface<
         const Artefact artefact = writeArtefact(made, volume_ / made.name);
         const Data ticket = sealed(artefact.payload());
         const Data older = sealed(artefact.payload().entry(2, hashOf(1)).entry(2, hashOf(2)));
-        serveTicket(ticket);
         // One without a ticket, and one with a longer one.
         for (const std::string& before : {artefact.contents, artefact.stapledWith(older)}) {
             interruptEverywhere(
-                artefact.path,
-                [&] {
-                    clear();
-                    writeFile(artefact.path, before);
-                },
-                [&]() -> std::optional<std::string> { return readFile(artefact.path); },
-                artefact.stapledWith(ticket), [&] { repair(artefact); }, signal);
+                {.path = artefact.path,
+                 .ticket = ticket,
+                 .prepare =
+                     [&] {
+                         clear();
+                         writeFile(artefact.path, before);
+                     },
+                 .look = [&]() -> std::optional<std::string> { return readFile(artefact.path); },
+                 .after = artefact.stapledWith(ticket),
+                 .repair = [&] { repair(artefact); }},
+                signal);
             if (HasFailure()) return;
         }
+    }
+
+    // A server takes a limited number of connections.
+    static constexpr std::size_t kRunsPerServer = 50;
+
+    void serveAfresh(const Data& ticket) {
+        service();
+        startService(identityOf(serverChain));
+        serveTicket(ticket);
     }
 
     void repair(const Artefact& artefact) {
@@ -171,19 +189,21 @@ TEST_P(Crash, LeavesABundleThatCanBeStapledAgain) {
     std::filesystem::copy(bundle, moved, std::filesystem::copy_options::recursive);
     bundle = moved;
     const Data fresh = ticket();
-    serveTicket(fresh);
     for (const bool wasStapled : {false, true}) {
-        interruptEverywhere(
-            bundle,
-            [&] {
-                std::filesystem::remove(ticketPath());
-                if (wasStapled) stapleByHand(ticketForOthers());
-            },
-            [&]() -> std::optional<std::string> {
-                if (const auto now = stapled()) return foundation::toString(*now);
-                return std::nullopt;
-            },
-            foundation::toString(fresh), [] {}, SIGKILL);
+        interruptEverywhere({.path = bundle,
+                             .ticket = fresh,
+                             .prepare =
+                                 [&] {
+                                     std::filesystem::remove(ticketPath());
+                                     if (wasStapled) stapleByHand(ticketForOthers());
+                                 },
+                             .look = [&]() -> std::optional<std::string> {
+                                 if (const auto now = stapled()) return foundation::toString(*now);
+                                 return std::nullopt;
+                             },
+                             .after = foundation::toString(fresh),
+                             .repair = [] {}},
+                            SIGKILL);
         if (HasFailure()) return;
     }
 }

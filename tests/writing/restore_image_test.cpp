@@ -1,0 +1,131 @@
+// scripts/restore-image: what it puts right is tested where images are left half written (faults and
+// crashes); here, what it does not touch.
+#include <gtest/gtest.h>
+
+#include <filesystem>
+
+#include "e2e/artefacts.h"
+#include "support/process.h"
+#include "support/temporary_directory.h"
+
+namespace pinwell::test {
+namespace {
+
+class RestoreImage : public testing::Test {
+  protected:
+    ProcessResult restore(std::vector<std::string> arguments) const {
+        return runProcess({.executable = RESTORE_IMAGE,
+                           .arguments = std::move(arguments),
+                           .environment = {{"PATH", "/usr/bin:/bin"}},
+                           .workingDirectory = directory.path()});
+    }
+
+    // As a write in place saves it: what stands behind the image's data.
+    void writeCopy(const std::string& bytes) const { writeFile(copy, bytes); }
+
+    void expectRefused(int status) const {
+        const ProcessResult result = restore({image, copy});
+        EXPECT_EQ(result.exitStatus, status);
+        EXPECT_EQ(linesOf(result.errors).size(), 1U) << result.errors;
+        EXPECT_TRUE(readFile(image) == before);
+    }
+
+    TemporaryDirectory directory;
+    const std::string image = directory / "Image.dmg";
+    const std::string copy = directory / "Image.dmgData";
+    const Data data = irregularData(10'000);
+    const Artefact artefact = signedImage(data);
+    const std::string stapled = artefact.stapledWith(foundation::toData("TICKET"));
+    const std::string tail = stapled.substr(data.size());
+    const std::string before = artefact.contents;
+
+    RestoreImage() {
+        writeFile(image, before);
+        writeCopy(tail);
+    }
+};
+
+TEST_F(RestoreImage, MakesTheImageWhatTheStapleWouldHaveMade) {
+    for (const std::size_t half :
+         {std::size_t{0}, std::size_t{1}, tail.size() / 2, tail.size() - 1, tail.size()}) {
+        const std::string old = before.substr(data.size());
+        writeFile(image,
+                  foundation::toString(data) + tail.substr(0, half) + old.substr(std::min(half, old.size())));
+        const ProcessResult result = restore({image, copy});
+        EXPECT_EQ(result.exitStatus, 0) << result.errors;
+        EXPECT_EQ(result.output, "");
+        EXPECT_TRUE(readFile(image) == stapled) << half;
+    }
+}
+
+TEST_F(RestoreImage, CutsOffWhatALongerTailHasLeft) {
+    writeFile(image, stapled + std::string(100'000, 'x'));
+    EXPECT_EQ(restore({image, copy}).exitStatus, 0);
+    EXPECT_TRUE(readFile(image) == stapled);
+}
+
+TEST_F(RestoreImage, TakesNamesThatLookLikeOptions) {
+    std::filesystem::rename(image, directory / "-image");
+    std::filesystem::rename(copy, directory / "-copy");
+    EXPECT_EQ(restore({"-image", "-copy"}).exitStatus, 0);
+    EXPECT_TRUE(readFile(directory / "-image") == stapled);
+}
+
+TEST_F(RestoreImage, ExplainsItself) {
+    EXPECT_EQ(restore({}).exitStatus, 64);
+    EXPECT_EQ(restore({image}).errors, "Usage: restore-image IMAGE COPY.dmgData\n");
+}
+
+TEST_F(RestoreImage, RefusesWhatItCannotRead) {
+    std::filesystem::remove(copy);
+    expectRefused(66);
+    std::filesystem::create_directory(copy);
+    expectRefused(66);
+}
+
+TEST_F(RestoreImage, RefusesALink) {
+    std::filesystem::rename(copy, directory / "elsewhere");
+    std::filesystem::create_symlink("elsewhere", copy);
+    expectRefused(66);
+}
+
+TEST_F(RestoreImage, RefusesACopyWithoutATrailer) {
+    writeCopy(tail.substr(0, tail.size() - 1));
+    expectRefused(65);
+}
+
+TEST_F(RestoreImage, RefusesACopyWithoutASignatureArea) {
+    writeCopy("x" + tail.substr(1));
+    expectRefused(65);
+}
+
+TEST_F(RestoreImage, RefusesACopyThatIsTooShort) {
+    for (const std::size_t size : {std::size_t{0}, std::size_t{511}, std::size_t{512}, std::size_t{523}}) {
+        writeCopy(tail.substr(tail.size() - std::min(size, tail.size())));
+        expectRefused(65);
+    }
+}
+
+TEST_F(RestoreImage, RefusesACopyOfAnotherLengthThanItSays) {
+    writeCopy(tail.substr(0, 20) + tail.substr(21));
+    expectRefused(65);
+}
+
+TEST_F(RestoreImage, RefusesAnImageThatEndsBeforeItsData) {
+    const std::string shorter = before.substr(0, data.size() - 1);
+    writeFile(image, shorter);
+    EXPECT_EQ(restore({image, copy}).exitStatus, 65);
+    EXPECT_TRUE(readFile(image) == shorter);
+}
+
+TEST_F(RestoreImage, RefusesAPlaceThatNoFileReaches) {
+    for (const char first : {'\x7F', '\x80', '\xFF'}) {
+        std::string wrong = tail;
+        wrong.at(wrong.size() - 512 + 296) = first;
+        writeCopy(wrong);
+        expectRefused(65);
+    }
+}
+
+}  // namespace
+}  // namespace pinwell::test
