@@ -23,6 +23,8 @@
 namespace pinwell::test {
 namespace {
 
+using testing::AnyOf;
+
 // Volumes whose backing files are in memory: what is flushed is flushed at once.
 class InMemory {
   private:
@@ -75,7 +77,8 @@ class Crash : InMemory, public EndToEndTest, public testing::WithParamInterface<
             empty(volume_ / "tmp");
             scene.prepare();
             const auto before = scene.look();
-            const TracedRun run = interruptRun(command({"staple", scene.path}), calls, number, signal);
+            const TracedRun run =
+                interruptRun(command({"staple", scene.path}), calls, number, sending(signal));
             if (!run.interruptedAt) {
                 EXPECT_EQ(run.exitStatus, 0);
                 EXPECT_TRUE(scene.look() == scene.after);
@@ -215,6 +218,68 @@ TEST_P(Crash, OfASignalThatCanWaitComesAfterTheImageIsWritten) {
 TEST_P(Crash, OfASignalThatCanWaitComesAfterThePackageIsWritten) {
     interruptStapleOf(signedPackage(), SIGINT);
 }
+
+// Not the tool is interrupted, but its file changed under it.
+class ChangedWhileRead : public Crash {
+  protected:
+    using Change = std::function<void(const std::string& path)>;
+
+    // The change was made to the file before it was read, or after it was written.
+    void expectOneAfterTheOther(const Artefact& artefact, const Data& ticket, const Change& change) {
+        const std::string now = readFile(artefact.path);
+        const std::string stapled = artefact.stapledWith(ticket);
+        const std::string tail = stapled.substr(std::min(artefact.contents.size(), stapled.size()));
+        const auto changed = [&](const std::string& contents) {
+            writeFile(artefact.path, contents);
+            change(artefact.path);
+            return readFile(artefact.path);
+        };
+        EXPECT_TRUE(now == stapled || now == changed(stapled) ||
+                    (artefact.name.ends_with(".pkg") && now == changed(artefact.contents) + tail));
+    }
+
+    void changeEverywhere(const Change& change) {
+        if (const auto reason = missing()) GTEST_SKIP() << *reason;
+        const TracedCalls calls{.directory = volume_.path(), .changesOnly = false};
+        const std::size_t step = std::getenv("PINWELL_EVERY_CALL") == nullptr ? 7 : 1;
+        for (const Artefact& made : {unsignedImage(), signedImage(), signedPackage()}) {
+            const Artefact artefact = writeArtefact(made, volume_ / made.name);
+            const Data ticket = sealed(artefact.payload());
+            std::size_t changes = 0;
+            for (std::size_t number = 0;; number += step) {
+                if (changes % kRunsPerServer == 0) serveAfresh(ticket);
+                empty(volume_ / "tmp");
+                clear();
+                writeFile(artefact.path, artefact.contents);
+                const TracedRun run = interruptRun(command({"staple", artefact.path}), calls, number,
+                                                   [&](int) { change(artefact.path); });
+                if (!run.interruptedAt) break;
+                ++changes;
+                SCOPED_TRACE(foundation::format("%@ at call %lu, %@", made.name, number, *run.interruptedAt));
+                ASSERT_TRUE(run.exitStatus.has_value());
+                EXPECT_THAT(*run.exitStatus, AnyOf(0, 65, 66, 73));
+                if (*run.exitStatus == 0) expectOneAfterTheOther(artefact, ticket, change);
+            }
+            EXPECT_GT(changes, 10U);
+            std::cout << made.name << ": changed at " << changes << " calls\n";
+        }
+    }
+};
+
+TEST_P(ChangedWhileRead, AFileThatIsCutShortIsNotWritten) {
+    changeEverywhere([](const std::string& path) {
+        std::filesystem::resize_file(path, std::filesystem::file_size(path) / 2);
+    });
+}
+
+TEST_P(ChangedWhileRead, AFileThatGrowsIsNotWritten) {
+    changeEverywhere([](const std::string& path) {
+        std::filesystem::resize_file(path, std::filesystem::file_size(path) + 5000);
+    });
+}
+
+// The way in place has no second look: what changes between the look and the write is written to.
+INSTANTIATE_TEST_SUITE_P(ByClone, ChangedWhileRead, testing::Values("xfs"));
 
 INSTANTIATE_TEST_SUITE_P(OnVolumes, Crash, testing::Values("xfs", "btrfs", "ext4"),
                          [](const auto& volume) { return std::string(volume.param); });

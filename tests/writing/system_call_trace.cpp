@@ -109,8 +109,11 @@ std::string pathOfDescriptor(pid_t thread, int descriptor) {
 
 class Trace {
   public:
-    Trace(const Command& command, TracedCalls calls, std::size_t number, int signal)
-        : calls_(std::move(calls)), number_(number), signal_(signal), process_(start(command)) {}
+    Trace(const Command& command, TracedCalls calls, std::size_t number, Interruption interruption)
+        : calls_(std::move(calls)),
+          number_(number),
+          interruption_(std::move(interruption)),
+          process_(start(command)) {}
 
     ~Trace() {
         if (ended_) return;
@@ -199,7 +202,7 @@ class Trace {
         if (calls_.changesOnly && !changes) return;
         if (seen_++ != number_) return;
         result_.interruptedAt = call->name;
-        kill(process_, signal_);
+        interruption_(process_);
     }
 
     // O_DIRECTORY is part of O_TMPFILE.
@@ -227,7 +230,7 @@ class Trace {
 
     const TracedCalls calls_;
     const std::size_t number_;
-    const int signal_;
+    const Interruption interruption_;
     const pid_t process_;
     std::set<pid_t> known_;
     std::size_t seen_ = 0;
@@ -237,13 +240,19 @@ class Trace {
 
 }  // namespace
 
-TracedRun interruptRun(const Command& command, const TracedCalls& calls, std::size_t number, int signal) {
-    return Trace(command, calls, number, signal).run();
+Interruption sending(int signal) {
+    return [signal](int process) { kill(process, signal); };
+}
+
+TracedRun interruptRun(const Command& command, const TracedCalls& calls, std::size_t number,
+                       const Interruption& interruption) {
+    return Trace(command, calls, number, interruption).run();
 }
 
 std::optional<std::string> tracingMissing() {
     try {
-        const TracedRun run = interruptRun({.executable = "/bin/true"}, {.directory = "/none"}, 0, SIGKILL);
+        const TracedRun run =
+            interruptRun({.executable = "/bin/true"}, {.directory = "/none"}, 0, sending(SIGKILL));
         if (run.exitStatus == 0) return std::nullopt;
         return "a traced program did not end as it should";
     } catch (const std::system_error& error) {

@@ -1,13 +1,14 @@
-// A program run under ptrace(2), stopped at one of its system calls, and ended there by a signal.
+// A program run under ptrace(2) and stopped at one of its system calls, for something to happen there.
 //
-//   const TracedRun run = interruptRun(command, {.directory = volume.path()}, 17, SIGKILL);
+//   const TracedRun run = interruptRun(command, {.directory = volume.path()}, 17, sending(SIGKILL));
 //
 // The calls that count are those that touch files below one directory: by a path, or by a descriptor that
-// leads there. A signal is sent when the call has been entered and not begun: SIGKILL leaves on the disk what
-// the calls before it have made, and nothing of this one.
+// leads there. It happens when the call has been entered and not begun: SIGKILL leaves on the disk what the
+// calls before it have made, and nothing of this one.
 #pragma once
 
 #include <cstddef>
+#include <functional>
 #include <optional>
 #include <string>
 
@@ -28,10 +29,15 @@ struct TracedRun {
     int signal = 0;
 };
 
-/// Runs the command (its outputs go nowhere) and sends the signal at the call of that number, counted from 0.
+/// What happens; it is given the number of the process, which stands still or waits elsewhere.
+using Interruption = std::function<void(int process)>;
+Interruption sending(int signal);
+
+/// Runs the command (its outputs go nowhere) and interrupts it at the call of that number, counted from 0.
 /// From one thread; the process must have no other children meanwhile. Throws std::system_error when the
 /// program cannot be started, or not be traced.
-TracedRun interruptRun(const Command& command, const TracedCalls& calls, std::size_t number, int signal);
+TracedRun interruptRun(const Command& command, const TracedCalls& calls, std::size_t number,
+                       const Interruption& interruption);
 
 /// Why that cannot be done here; nothing when it can.
 std::optional<std::string> tracingMissing();
