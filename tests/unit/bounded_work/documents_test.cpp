@@ -1,0 +1,132 @@
+#include <gtest/gtest.h>
+
+#include "allocation_count.h"
+#include "foundation/base64.h"
+#include "foundation/description.h"
+#include "foundation/json.h"
+#include "foundation/property_list.h"
+
+namespace pinwell::test {
+namespace {
+
+using foundation::asBytes;
+using foundation::parseJSON;
+using foundation::parsePropertyList;
+
+constexpr std::size_t kMebibyte = std::size_t{1024} * 1024;
+
+// A container or value is some hundred bytes, and a list of them grows by doubling.
+constexpr std::size_t kBytesPerValue = 1024;
+
+std::string repeated(std::string_view text, std::size_t count) {
+    std::string all;
+    for (std::size_t i = 0; i < count; ++i) all += text;
+    return all;
+}
+
+TEST(BoundedWork, JSONNestedAMillionDeepIsLeftAtTheLimit) {
+    for (const auto* const opening : {"[", "{\"a\":"}) {
+        const std::string document = repeated(opening, 1'000'000);
+        const AllocationCount count;
+        EXPECT_FALSE(parseJSON(asBytes(document)));
+        EXPECT_LE(count.bytes(), foundation::kMaximumJSONDepth * kBytesPerValue);
+    }
+}
+
+TEST(BoundedWork, JSONOfMillionsOfValuesIsLeftAtTheLimit) {
+    const std::string document = "[" + repeated("0,", 8 * foundation::kMaximumJSONValues) + "0]";
+    const AllocationCount count;
+    EXPECT_FALSE(parseJSON(asBytes(document)));
+    EXPECT_LE(count.largest(), foundation::kMaximumJSONValues * 128);
+    EXPECT_LE(count.bytes(), foundation::kMaximumJSONValues * 256);
+}
+
+// Each pair of brackets is a value: the costliest for its length.
+TEST(BoundedWork, JSONOfTheMostContainersTakesAFixedAmountForEach) {
+    const std::string document = "[" + repeated("[0],", foundation::kMaximumJSONValues / 2 - 2) + "0]";
+    const AllocationCount count;
+    EXPECT_TRUE(parseJSON(asBytes(document)));
+    EXPECT_LE(count.blocks(), foundation::kMaximumJSONValues * 4);
+    EXPECT_LE(count.bytes(), foundation::kMaximumJSONValues * kBytesPerValue);
+}
+
+TEST(BoundedWork, JSONNumberOfAMillionDigitsTakesAFixedAmountForEachDigit) {
+    const std::string document = "[" + repeated("9", kMebibyte) + "]";
+    const AllocationCount count;
+    EXPECT_FALSE(parseJSON(asBytes(document)));
+    EXPECT_LE(count.bytes(), 32 * document.size());
+}
+
+TEST(BoundedWork, DescriptionGrowsWithItsValueAndNotWithItsDepth) {
+    constexpr std::size_t kValues = 100'000;
+    constexpr unsigned kDepth = foundation::kMaximumJSONDepth;
+    const std::string document =
+        repeated("[", kDepth) + repeated("0,", kValues) + "0" + repeated("]", kDepth);
+    const auto value = parseJSON(asBytes(document));
+    ASSERT_TRUE(value);
+    const AllocationCount count;
+    EXPECT_LE(foundation::describe(*value).size(), 256 * (kValues + kDepth));
+    EXPECT_LE(count.bytes(), 4 * 256 * (kValues + kDepth));
+}
+
+TEST(BoundedWork, Base64TakesNoMoreThanItsText) {
+    const std::string text = repeated("AAAA", 4 * kMebibyte);
+    const AllocationCount count;
+    EXPECT_TRUE(foundation::decodeBase64(text));
+    EXPECT_LE(count.bytes(), 2 * text.size());
+}
+
+TEST(BoundedWork, PropertyListNestedToItsLimitOfLengthIsRefused) {
+    const std::string document = "<plist>" + repeated("<array>", foundation::kMaximumPropertyListSize / 8);
+    const AllocationCount count;
+    EXPECT_FALSE(parsePropertyList(asBytes(document)));
+    EXPECT_LE(count.bytes(), 3 * document.size());
+}
+
+TEST(BoundedWork, PropertyListOfTooManyValuesIsRefusedBeforeOneIsMade) {
+    const std::string document = "<plist><array>" +
+                                 repeated("<true/>", foundation::kMaximumPropertyListValues + 1) +
+                                 "</array></plist>";
+    const AllocationCount count;
+    EXPECT_FALSE(parsePropertyList(asBytes(document)));
+    EXPECT_LE(count.blocks(), 100U);
+    EXPECT_LE(count.bytes(), 3 * document.size());
+}
+
+TEST(BoundedWork, PropertyListWithEntitiesThatUnfoldIsRefused) {
+    std::string document = "<!DOCTYPE plist [<!ENTITY a0 'aaaaaaaaaa'>";
+    for (int i = 1; i < 30; ++i) {
+        const std::string before = "&a" + std::to_string(i - 1) + ";";
+        document += "<!ENTITY a" + std::to_string(i) + " '" + repeated(before, 10) + "'>";
+    }
+    document += "]><plist><string>&a29;</string></plist>";
+    const AllocationCount count;
+    EXPECT_FALSE(parsePropertyList(asBytes(document)));
+    EXPECT_LE(count.bytes(), 4 * document.size());
+}
+
+// Forty arrays, each of which holds the next one twice: 2^40 values in some hundred bytes.
+TEST(BoundedWork, BinaryPropertyListThatUnfoldsIsRefused) {
+    constexpr char kObjects = 40;
+    std::string document = "bplist00";
+    std::string offsets;
+    for (char i = 0; i < kObjects; ++i) {
+        offsets += static_cast<char>(document.size());
+        document += '\xA2';
+        document += static_cast<char>(i + 1);
+        document += static_cast<char>(i + 1);
+    }
+    offsets += static_cast<char>(document.size());
+    document += '\x09';
+    const char table = static_cast<char>(document.size());
+    document += offsets + std::string(6, '\0') + "\x01\x01" + std::string(7, '\0');
+    document += static_cast<char>(kObjects + 1);
+    document += std::string(8, '\0') + std::string(7, '\0') + table;
+
+    const AllocationCount count;
+    EXPECT_FALSE(parsePropertyList(asBytes(document)));
+    EXPECT_LE(count.bytes(), kMebibyte);
+}
+
+}  // namespace
+}  // namespace pinwell::test
