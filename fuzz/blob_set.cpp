@@ -1,0 +1,65 @@
+// The superblob of a disk image, taken apart to be put together again.
+#include <algorithm>
+
+#include "foundation/byte_reader.h"
+#include "src/PWHashedFile/blob_set.h"
+#include "target.h"
+
+namespace pinwell::fuzz {
+namespace {
+
+struct Header {
+    std::uint32_t magic = 0;
+    std::uint32_t length = 0;
+    std::uint32_t count = 0;
+};
+
+Header headerOf(ByteView superblob) {
+    foundation::ByteReader reader(superblob);
+    Header header;
+    header.magic = reader.be32("magic");
+    header.length = reader.be32("length");
+    header.count = reader.be32("count");
+    return header;
+}
+
+bool isTicket(const BlobRecord& record) {
+    return slotTypeOf(record) == kTicketSlotType;
+}
+
+std::uint64_t offsetOf(const BlobRecord& record) {
+    return record.find(kBlobOffsetKey)->second.unsignedIntegerValue();
+}
+
+}  // namespace
+
+void examine(ByteView input) {
+    discardMessages();
+    if (input.size() < kSuperblobHeaderSize) return;
+    const Header header = headerOf(input);
+    const auto blobs = orderedBlobSetForSuperBlob(input, header.count);
+    if (!blobs) return;
+    require(blobs->size() <= header.count, "no more blobs than were counted");
+    for (const BlobRecord& record : *blobs) {
+        require(dataOf(record).size() == lengthOf(record), "a blob is as long as it says");
+        require(std::ranges::equal(dataOf(record), input.subspan(offsetOf(record), lengthOf(record))),
+                "a blob is what stands at its offset");
+    }
+    if (blobs->size() < header.count) return;
+
+    const Data rebuilt = superblobWithTicket(*blobs, {});
+    const bool isOurs = header.magic == kSuperblobMagic && header.length == input.size();
+    if (isOurs && !blobs->empty() && std::ranges::none_of(*blobs, isTicket))
+        require(std::ranges::equal(rebuilt, input), "what is taken apart goes together again");
+
+    const Data ticket = foundation::toData("ticket");
+    const Data stapled = superblobWithTicket(*blobs, ticket);
+    const auto again = orderedBlobSetForSuperBlob(stapled, headerOf(stapled).count);
+    if (header.count == kMaximumBlobCount) return;
+    require(again && std::ranges::count_if(*again, isTicket) == 1, "there is one ticket afterwards");
+    require(std::ranges::equal(dataOf(again->back()).subspan(kBlobHeaderSize), ticket),
+            "the ticket reads back");
+    require(superblobWithTicket(*again, {}) == rebuilt, "without its ticket it is what it was");
+}
+
+}  // namespace pinwell::fuzz

@@ -1,0 +1,56 @@
+// An executable image, thin or universal, as far as the signatures of its slices.
+#include "codesign/executable_image.h"
+
+#include <algorithm>
+
+#include "codesign/code_error.h"
+#include "codesign/code_signature.h"
+#include "codesign/superblob.h"
+#include "foundation/byte_reader.h"
+#include "target.h"
+
+namespace pinwell::fuzz {
+namespace {
+
+using codesign::FileRange;
+
+bool liesWithin(const FileRange& part, const FileRange& whole) {
+    return part.offset >= whole.offset && part.length <= whole.length &&
+           part.offset - whole.offset <= whole.length - part.length;
+}
+
+void examineSlice(const codesign::ByteSource& source, const codesign::ImageSlice& slice) {
+    require(liesWithin(slice.range, {0, source.size()}), "a slice lies within the file");
+    const auto range = codesign::findImageSignature(source, slice);
+    if (!range) return;
+    require(liesWithin(*range, slice.range), "a signature lies within its slice");
+    const Data superblob = codesign::readSuperBlob(source, range->offset, range->length);
+    require(superblob.size() <= range->length, "a superblob lies within its area");
+    const auto signature = codesign::CodeSignature::parse(codesign::componentsOfSuperBlob(superblob));
+    if (signature) signature->requireValid();
+}
+
+}  // namespace
+
+void examine(ByteView input) {
+    const codesign::MemorySource source(foundation::toData(input));
+    try {
+        const bool isImage = codesign::isExecutableImage(source);
+        const auto slices = codesign::readSlices(source);
+        require(isImage, "only an image has slices");
+        require(!slices.empty() && slices.size() <= codesign::kMaximumSlices, "slices are counted");
+        const auto& preferred = codesign::preferredSlice(slices);
+        require(std::ranges::any_of(slices, [&](const auto& slice) { return &slice == &preferred; }),
+                "the preferred slice is one of them");
+        for (const auto& slice : slices) {
+            try {
+                examineSlice(source, slice);
+            } catch (const codesign::CodeError&) {
+            } catch (const foundation::ShortRead&) {
+            }
+        }
+    } catch (const codesign::CodeError&) {
+    }
+}
+
+}  // namespace pinwell::fuzz

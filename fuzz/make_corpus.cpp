@@ -1,0 +1,274 @@
+// Writes the seeds of every fuzz target, from the builders that the tests use: one directory a target, one
+// file a seed, named after what it holds.
+//
+//   make_corpus DIRECTORY
+#include <cstdio>
+#include <exception>
+#include <string>
+
+#include "foundation/byte_writer.h"
+#include "foundation/property_list.h"
+#include "support/archive_builder.h"
+#include "support/certificate_builder.h"
+#include "support/cms_signer.h"
+#include "support/controller_run.h"
+#include "support/disk_image_builder.h"
+#include "support/executable_image_builder.h"
+#include "support/package_builder.h"
+#include "support/temporary_directory.h"
+#include "support/ticket_builder.h"
+
+namespace pinwell::test {
+namespace {
+
+using foundation::asBytes;
+using foundation::toData;
+
+/// The seeds of one target.
+class Seeds {
+  public:
+    Seeds(const std::string& corpus, const std::string& target) : directory_(corpus + "/" + target + "/") {}
+
+    Seeds& add(const std::string& name, ByteView contents) {
+        writeFile(directory_ + name, contents);
+        return *this;
+    }
+    Seeds& add(const std::string& name, std::string_view contents) { return add(name, asBytes(contents)); }
+
+  private:
+    std::string directory_;
+};
+
+void makeTickets(const std::string& corpus) {
+    const IssuedChain chain = TicketChain().issue();
+    const Data two = TicketPayloadBuilder().entry(2, hashOf(1)).entry(1, hashOf(2)).revoked().build();
+    const Data long48 =
+        TicketPayloadBuilder().hashLength(48).entry(4, hashOf(3, 48)).entry(2, hashOf(4, 48)).build();
+    const Data old = TicketPayloadBuilder().version(1).entry(0, hashOf(5)).build();
+    const Data unknown = TicketPayloadBuilder().entry(0, hashOf(6)).entry(9, hashOf(7)).build();
+    Seeds(corpus, "ticket")
+        .add("container", SatchelBuilder::of(chain, two).build())
+        .add("container_small", SatchelBuilder().certificate(derElement(0x30, {})).payload(old).build())
+        .add("container_length_of_certificates",
+             SatchelBuilder::of(chain, two).certificateBlockLength(~0U).build())
+        .add("container_length_of_payload", SatchelBuilder::of(chain, two).payloadLength(~0U).build())
+        .add("payload", two)
+        .add("payload_sha384", long48)
+        .add("payload_version_1", old)
+        .add("payload_unknown_algorithms", unknown)
+        .add("payload_count", TicketPayloadBuilder().count(~0U).build());
+}
+
+Data certificateBlock(const std::vector<Data>& certificates) {
+    Data contents;
+    for (const Data& certificate : certificates) foundation::append(contents, certificate);
+    return derElement(0x30, contents);
+}
+
+void makeCertificateBlocks(const std::string& corpus) {
+    TicketChain fields;
+    const IssuedChain chain = fields.issue();
+    fields.leaf.subjectAlternativeNames = "DNS:a.example,IP:127.0.0.1";
+    fields.leaf.extendedKeyUsage = "serverAuth,1.2.3.4";
+    fields.leaf.keyUsage = "critical,digitalSignature";
+    fields.leaf.extensions.push_back({.oid = "1.2.3.4.5", .critical = true});
+    fields.intermediate.key = SigningKey::cached(KeyKind::rsa2048, "seed");
+    const IssuedChain other = fields.issue();
+    Seeds(corpus, "certificate_block")
+        .add("chain", certificateBlock(chain.list()))
+        .add("extensions", certificateBlock(other.list()))
+        .add("leaf", certificateBlock({chain.leaf.der}))
+        .add("four", certificateBlock({chain.leaf.der, chain.leaf.der, chain.leaf.der, chain.leaf.der}))
+        .add("empty", certificateBlock({}))
+        .add("filler", certificateBlock({derElement(0x30, derElement(0x30, derElement(0x02, toData("1"))))}));
+}
+
+void makeSuperblobs(const std::string& corpus) {
+    const Data signature = DiskImageBuilder::signature().build();
+    const Data stapled = DiskImageBuilder::signature().blob(kSampleTicketSlot, ticketBlob("ticket")).build();
+    Seeds(corpus, "blob_set")
+        .add("empty", SuperBlobBuilder().build())
+        .add("signature", signature)
+        .add("stapled", stapled)
+        .add("reversed", DiskImageBuilder::signature().reverseIndex().build())
+        .add("gap", SuperBlobBuilder().gap(4).blob(0, makeBlob(1, toData("a"))).build())
+        .add("count", DiskImageBuilder::signature().count(~0U).build());
+
+    Seeds(corpus, "disk_image")
+        .add("unsigned", DiskImageBuilder().build())
+        .add("signed", DiskImageBuilder().superblob(signature).build())
+        .add("stapled", DiskImageBuilder().superblob(stapled).build())
+        .add("version", DiskImageBuilder().version(5).build())
+        .add("offset", DiskImageBuilder().superblob(signature).codeSignOffset(~0ULL).build())
+        .add("length", DiskImageBuilder().superblob(signature).codeSignLength(~0ULL).build());
+}
+
+Data signedDirectory(const Data& directory, bool timestamped) {
+    CmsBuilder cms(directory);
+    if (timestamped) cms.timestamp(TimestampBuilder());
+    return SuperBlobBuilder().blob(0, directory).blob(2, emptyRequirements()).cms(cms.build()).build();
+}
+
+void makeCodeSignatures(const std::string& corpus) {
+    const Data requirements = emptyRequirements();
+    const Data plain = CodeDirectoryBuilder().build();
+    const Data full = CodeDirectoryBuilder()
+                          .version(0x20500)
+                          .flags(0)
+                          .team("TEAM123456")
+                          .scatter(Data(48))
+                          .covers(2, requirements)
+                          .build();
+    Seeds seeds(corpus, "code_signature");
+    seeds.add("ad_hoc", SuperBlobBuilder::adHoc().build())
+        .add("directory", plain)
+        .add("directory_full", full)
+        .add("signed", signedDirectory(full, false))
+        .add("timestamped", signedDirectory(full, true));
+    SuperBlobBuilder alternates;
+    alternates.blob(0, CodeDirectoryBuilder().digestType(1).build()).blob(2, requirements);
+    for (std::uint32_t type = 2; type <= 4; ++type)
+        alternates.blob(0x1000 + type - 2,
+                        CodeDirectoryBuilder().digestType(static_cast<std::uint8_t>(type)).build());
+    seeds.add("alternates", alternates.build());
+    for (const std::uint32_t version : {0x20001U, 0x20100U, 0x20200U, 0x20300U})
+        seeds.add("directory_" + std::to_string(version), CodeDirectoryBuilder().version(version).build());
+}
+
+void makeMessages(const std::string& corpus) {
+    const Data content = toData("a code directory");
+    const auto seed = [&](const CmsBuilder& builder) {
+        return foundation::ByteWriter()
+            .u8(static_cast<std::uint8_t>(content.size()))
+            .bytes(content)
+            .bytes(builder.build())
+            .data();
+    };
+    Seeds(corpus, "cms")
+        .add("ec", seed(CmsBuilder(content)))
+        .add("rsa", seed(CmsBuilder(content).key(TestKey::rsa2048)))
+        .add("ber", seed(CmsBuilder(content).ber()))
+        .add("attached", seed(CmsBuilder(content).attached()))
+        .add("without_attributes", seed(CmsBuilder(content).withoutSignedAttributes()))
+        .add("without_certificate", seed(CmsBuilder(content).withoutCertificate()))
+        .add("timestamp", seed(CmsBuilder(content).timestamp(TimestampBuilder())))
+        .add("timestamp_sha384", seed(CmsBuilder(content).timestamp(TimestampBuilder().imprintDigest(4))))
+        .add("timestamp_plain_data", seed(CmsBuilder(content).timestamp(TimestampBuilder().asPlainData())));
+}
+
+void makeExecutables(const std::string& corpus) {
+    const Data thin = ExecutableImageBuilder().build();
+    const Data other = ExecutableImageBuilder().cpuType(kSampleX86).bits32().build();
+    const Data cms = signedDirectory(CodeDirectoryBuilder().flags(0).build(), true);
+    Seeds(corpus, "executable_image")
+        .add("thin", thin)
+        .add("thin_32_big_endian", ExecutableImageBuilder().bits32().bigEndian().build())
+        .add("unsigned", ExecutableImageBuilder().withoutSignature().build())
+        .add("signed", ExecutableImageBuilder().signature(cms).padding(Data(16)).build())
+        .add("universal", UniversalImageBuilder().slice(kSampleX86, other).slice(kSampleArm, thin).build())
+        .add("universal_wide", UniversalImageBuilder().wide().slice(kSampleArm, thin).build())
+        .add("slices", UniversalImageBuilder().count(~0U).build())
+        .add("commands", ExecutableImageBuilder().commandCount(~0U).build());
+}
+
+void makeArchives(const std::string& corpus) {
+    const std::string document =
+        R"(<?xml version="1.0"?><xar><toc><checksum style="sha1"><offset>0</offset><size>20</size></checksum>)"
+        R"(<creation-time>2026-11-20</creation-time><signature style="RSA"><offset>20</offset></signature>)"
+        R"(<x-signature style="CMS"/><file id="1"><name>&amp;a</name><data><![CDATA[x]]></data></file></toc></xar>)";
+    Seeds(corpus, "archive")
+        .add("unsigned", ArchiveBuilder().build())
+        .add("signed", ArchiveBuilder().signature("RSA").signature("CMS").build())
+        .add("named_digest", ArchiveBuilder().namedDigest("sha256").signature("CMS").build())
+        .add("without_digest", ArchiveBuilder().digest("none").toc(document).build())
+        .add("length", ArchiveBuilder().compressedLength(~0ULL).build());
+    Seeds(corpus, "table_of_contents")
+        .add("full", document)
+        .add("small", "<xar><toc/></xar>")
+        .add("namespaces", R"(<x:xar xmlns:x="urn:a"><x:toc><x:signature x:style="CMS"/></x:toc></x:xar>)")
+        .add("entity", R"(<!DOCTYPE xar [<!ENTITY a "b">]><xar><toc>&a;</toc></xar>)")
+        .add("twice", "<xar><toc><checksum/><checksum/></toc></xar>");
+
+    Seeds(corpus, "package_trailer")
+        .add("plain", PackageBuilder().archive(toData("archive")).build())
+        .add("terminator", PackageBuilder().archive(toData("archive")).terminator().build())
+        .add("ticket", PackageBuilder().archive(toData("archive")).terminator().ticket("ticket").build())
+        .add("unknown", PackageBuilder()
+                            .archive(toData("archive"))
+                            .terminator()
+                            .unknown("a")
+                            .ticket("t")
+                            .unknown("b")
+                            .build())
+        .add("length", PackageBuilder().trailer({.type = 2, .length = ~0U}).build())
+        .add("record", makeTrailer({}));
+}
+
+void makeDocuments(const std::string& corpus) {
+    using foundation::Array;
+    using foundation::Dictionary;
+    const Dictionary dictionary{{"CFBundleExecutable", "Sample"},
+                                {"array", Array{1, -1, true, 0.5}},
+                                {"data", toData("data")},
+                                {"empty", Dictionary{}},
+                                {"text", "<&>\u00E9"}};
+    const std::string binary(
+        "bplist00\xD1\x01\x02"
+        "Aa"
+        "\xA2\x03\x04\x10\x7F\x09\x08\x0B\x0D\x10\x12"
+        "\0\0\0\0\0\0\x01\x01\0\0\0\0\0\0\0\x05\0\0\0\0\0\0\0\0\0\0\0\0\0\0\0\x13",
+        51);
+    Seeds(corpus, "property_list")
+        .add("xml", *foundation::serializePropertyList(dictionary))
+        .add("kinds",
+             "<plist><array><date>2026-11-20T19:55:00Z</date><integer>0x10</integer><real>1e3</real>"
+             "<string>&#65;<![CDATA[<]]></string><dict><key>CF$UID</key><integer>1</integer></dict>"
+             "</array></plist>")
+        .add("entity", R"(<!DOCTYPE plist [<!ENTITY a "b">]><plist><string>&a;</string></plist>)")
+        .add("binary", binary);
+    Seeds(corpus, "json")
+        .add("kinds",
+             R"({"a":[1,-1,1.5,1e300,true,false,null,18446744073709551615],"b":{"\u00e9\ud83d\ude00":""}})")
+        .add("byte_order_mark", "\xEF\xBB\xBF[]")
+        .add("nested", "[[[[[[[[]]]]]]]]");
+
+    const std::string asset =
+        R"("signedTicketAsset":{"value":{"size":3,"downloadURL":"https://a.example/${f}"}})";
+    Seeds(corpus, "lookup_response")
+        .add("inline", ControllerRun::inlineAnswer(unsignedTicket({ControllerRun::fileHash()})))
+        .add("revoked", ControllerRun::inlineAnswer(unsignedTicket({ControllerRun::fileHash()}, 1)))
+        .add("other_file", ControllerRun::inlineAnswer(unsignedTicket({Data(20)})))
+        .add("large", R"({"records":[{"fields":{)" + asset + "}}]}")
+        .add(
+            "not_found",
+            R"({"records":[{"recordName":"2/2/ab","reason":"Record not found","serverErrorCode":"NOT_FOUND"}]})")
+        .add("empty", R"({"records":[]})");
+
+    Seeds(corpus, "configuration")
+        .add("host", R"({"lumora":{"host":"records.example.com:8443"}})")
+        .add("address", R"({"lumora":{"host":"[::1]:443"}})")
+        .add("address_4", R"({"lumora":{"host":"127.0.0.1"}})")
+        .add("defaults", R"({"text":"value","flag":false})")
+        .add("root", TicketChain().issue().root.pem());
+}
+
+}  // namespace
+}  // namespace pinwell::test
+
+int main(int argc, char** argv) {
+    using namespace pinwell::test;
+    if (argc != 2) {
+        std::fprintf(stderr, "Usage: %s DIRECTORY\n", argv[0]);
+        return 64;
+    }
+    try {
+        const std::string corpus = argv[1];
+        for (const auto make : {makeTickets, makeCertificateBlocks, makeSuperblobs, makeCodeSignatures,
+                                makeMessages, makeExecutables, makeArchives, makeDocuments})
+            make(corpus);
+        return 0;
+    } catch (const std::exception& failure) {
+        std::fprintf(stderr, "%s\n", failure.what());
+        return 1;
+    }
+}

@@ -1,0 +1,48 @@
+// A property list, in XML or in the binary form.
+#include "foundation/property_list.h"
+
+#include <algorithm>
+
+#include "foundation/description.h"
+#include "target.h"
+
+namespace pinwell::fuzz {
+namespace {
+
+using foundation::Value;
+
+// Values, and levels of them.
+struct Extent {
+    std::size_t values = 0;
+    unsigned depth = 0;
+    bool hasReals = false;  // which are written in fewer digits than they have
+};
+
+void measure(const Value& value, unsigned depth, Extent& extent) {
+    ++extent.values;
+    extent.depth = std::max(extent.depth, depth);
+    extent.hasReals = extent.hasReals || value.real() != nullptr;
+    if (const auto* elements = value.array())
+        for (const Value& element : *elements) measure(element, depth + 1, extent);
+    if (const auto* members = value.dictionary())
+        for (const auto& [key, member] : *members) measure(member, depth + 1, extent);
+}
+
+}  // namespace
+
+void examine(ByteView input) {
+    const auto value = foundation::parsePropertyList(input);
+    if (!value) return;
+    Extent extent;
+    measure(*value, 0, extent);
+    require(extent.depth <= foundation::kMaximumPropertyListDepth, "nesting is bounded");
+    require(extent.values <= foundation::kMaximumPropertyListValues, "values are counted");
+    static_cast<void>(foundation::describe(*value));
+
+    const auto written = foundation::serializePropertyList(*value);
+    if (!written || extent.hasReals) return;
+    const auto again = foundation::parsePropertyList(*written);
+    require(again && *again == *value, "what is written reads as the same");
+}
+
+}  // namespace pinwell::fuzz
