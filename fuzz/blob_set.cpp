@@ -1,6 +1,7 @@
 // The superblob of a disk image, taken apart to be put together again.
 #include <algorithm>
 
+#include "codesign/code_signing.h"
 #include "foundation/byte_reader.h"
 #include "src/PWHashedFile/blob_set.h"
 #include "target.h"
@@ -55,7 +56,7 @@ void examine(ByteView input) {
     const Data ticket = foundation::toData("ticket");
     const Data stapled = superblobWithTicket(*blobs, ticket);
     const auto again = orderedBlobSetForSuperBlob(stapled, headerOf(stapled).count);
-    if (header.count == kMaximumBlobCount) return;
+    if (header.count == codesign::kMaximumBlobCount) return;
     require(again && std::ranges::count_if(*again, isTicket) == 1, "there is one ticket afterwards");
     require(std::ranges::equal(dataOf(again->back()).subspan(kBlobHeaderSize), ticket),
             "the ticket reads back");

@@ -82,19 +82,18 @@ TEST(BoundedWork, SuperblobOfAMillionBlobsIsRefusedByItsCount) {
 }
 
 TEST(BoundedWork, SuperblobOfTheMostBlobsTakesAFixedAmountForEach) {
-    const Data forReading = superblobOfHeaders(codesign::kMaximumBlobCount);
+    const Data superblob = superblobOfHeaders(codesign::kMaximumBlobCount);
     {
         const AllocationCount count;
-        EXPECT_EQ(codesign::parseSuperBlob(forReading).size(), codesign::kMaximumBlobCount);
+        EXPECT_EQ(codesign::parseSuperBlob(superblob).size(), codesign::kMaximumBlobCount);
         EXPECT_LE(count.bytes(), codesign::kMaximumBlobCount * 256);
     }
-    const Data forWriting = superblobOfHeaders(kMaximumBlobCount);
     const AllocationCount count;
-    const auto blobs = orderedBlobSetForSuperBlob(forWriting, kMaximumBlobCount);
+    const auto blobs = orderedBlobSetForSuperBlob(superblob, codesign::kMaximumBlobCount);
     ASSERT_TRUE(blobs);
-    EXPECT_EQ(blobs->size(), kMaximumBlobCount);
-    EXPECT_LE(count.blocks(), kMaximumBlobCount * 16ULL);
-    EXPECT_LE(count.bytes(), kMaximumBlobCount * 2 * kKibibyte);
+    EXPECT_EQ(blobs->size(), codesign::kMaximumBlobCount);
+    EXPECT_LE(count.blocks(), codesign::kMaximumBlobCount * 16ULL);
+    EXPECT_LE(count.bytes(), codesign::kMaximumBlobCount * 2 * kKibibyte);
 }
 
 // Every entry leads to the one blob that takes up all of the rest.
