@@ -82,6 +82,13 @@ std::shared_ptr<const X509PublicKey> readPublicKey(const X509* certificate) {
     return std::make_shared<const X509PublicKey>(std::shared_ptr<EVP_PKEY>(key, EVP_PKEY_free));
 }
 
+/// There are three versions, and extensions in the last of them alone (RFC 5280, 4.1.2.1 and 4.1.2.9).
+bool isWhatItsVersionSays(const X509* certificate) {
+    const long version = X509_get_version(certificate);
+    return version == X509_VERSION_3 ||
+           ((version == X509_VERSION_1 || version == X509_VERSION_2) && X509_get_ext_count(certificate) == 0);
+}
+
 }  // namespace
 
 std::string_view X509PublicKey::type() const {
@@ -104,7 +111,8 @@ X509CertificateRef X509Certificate::parse(ByteView der) {
     const ErrorQueueGuard guard;
     const unsigned char* at = unsignedBytes(der);
     std::shared_ptr<X509> parsed(d2i_X509(nullptr, &at, static_cast<long>(der.size())), X509_free);
-    if (!parsed || at != unsignedBytes(der) + der.size()) return nullptr;
+    if (!parsed || at != unsignedBytes(der) + der.size() || !isWhatItsVersionSays(parsed.get()))
+        return nullptr;
 
     const std::optional<Date> notBefore = toDate(X509_get0_notBefore(parsed.get()));
     const std::optional<Date> notAfter = toDate(X509_get0_notAfter(parsed.get()));

@@ -37,6 +37,25 @@ TEST(Certificate, IsRefusedWithAnIndefiniteLength) {
     EXPECT_EQ(X509Certificate::parse(indefinite), nullptr);
 }
 
+TEST(Certificate, HasExtensionsInItsThirdVersionOnly) {
+    CertificateFields fields;
+    EXPECT_NE(made(fields), nullptr);
+    for (const int version : {1, 2, 4}) {
+        fields.version = version;
+        EXPECT_EQ(made(fields), nullptr) << version;
+    }
+}
+
+TEST(Certificate, MayBeOfAnEarlierVersionWithoutExtensions) {
+    CertificateFields fields;
+    fields.basicConstraints.reset();
+    fields.subjectKeyIdentifier = fields.authorityKeyIdentifier = test::KeyIdentifier::omitted();
+    for (const int version : {1, 2}) {
+        fields.version = version;
+        EXPECT_NE(made(fields), nullptr) << version;
+    }
+}
+
 TEST(Certificate, HasALimitOnItsSize) {
     const auto sized = [](std::size_t payload) {
         CertificateFields fields;
