@@ -14,9 +14,10 @@ function(pinwell_executable name)
   target_link_libraries(${name} PRIVATE pinwell_warnings pinwell_hardening pinwell_sanitizers)
 endfunction()
 
-# pinwell_test(NAME [TIMEOUT SECONDS] SOURCES...): a GoogleTest program; every test in it is a ctest of its own.
+# pinwell_test(NAME [WHOLE] [TIMEOUT SECONDS] SOURCES...): a GoogleTest program; every test in it is a ctest of its own,
+# or, with WHOLE, the program is one: for tables of many quick rows.
 function(pinwell_test name)
-  cmake_parse_arguments(PARSE_ARGV 1 test "" "TIMEOUT" "")
+  cmake_parse_arguments(PARSE_ARGV 1 test "WHOLE" "TIMEOUT" "")
   if(NOT test_TIMEOUT)
     set(test_TIMEOUT 120)
   endif()
@@ -25,5 +26,10 @@ function(pinwell_test name)
   target_compile_options(${name} PRIVATE ${pinwell_test_warnings})
   target_link_libraries(${name} PRIVATE pinwell_warnings pinwell_sanitizers test_support
                         GTest::gmock GTest::gtest_main)
-  gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST PROPERTIES TIMEOUT ${test_TIMEOUT})
+  if(test_WHOLE)
+    add_test(NAME ${name} COMMAND ${name})
+    set_tests_properties(${name} PROPERTIES TIMEOUT ${test_TIMEOUT})
+  else()
+    gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST PROPERTIES TIMEOUT ${test_TIMEOUT})
+  endif()
 endfunction()

@@ -244,7 +244,7 @@ std::string IssuedCertificate::pem() const {
 IssuedCertificate issueCertificate(const CertificateFields& fields, const IssuedCertificate* issuer) {
     const CertificateHandle certificate(X509_new());
     const DistinguishedName& issuerName = issuer != nullptr ? issuer->subject : fields.subject;
-    const SigningKey& signer = issuer != nullptr ? issuer->key : fields.key;
+    const SigningKey signer = fields.signer.value_or(issuer != nullptr ? issuer->key : fields.key);
 
     require(X509_set_version(certificate.get(), fields.version - 1) == 1, "version");
     require(ASN1_INTEGER_set_int64(X509_get_serialNumber(certificate.get()), fields.serial) == 1, "serial");

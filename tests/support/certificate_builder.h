@@ -108,7 +108,8 @@ struct CertificateFields {
     std::vector<ExtensionField> extensions = {};
 
     SignatureDigest digest = SignatureDigest::sha256;
-    bool corruptSignature = false;  // flips the last bit of the finished certificate
+    std::optional<SigningKey> signer = std::nullopt;  // the issuing certificate's key unless said otherwise
+    bool corruptSignature = false;                    // flips the last bit of the finished certificate
 };
 
 /// A certificate and what it takes to issue others with it.

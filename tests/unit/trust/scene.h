@@ -42,7 +42,8 @@ struct Scene {
     std::unique_ptr<TrustService> service() const {
         const auto parse = [](const std::vector<Data>& ders) {
             CertificateList certificates;
-            for (const Data& der : ders) certificates.push_back(X509Certificate::parse(der));
+            for (const Data& der : ders)
+                if (auto certificate = X509Certificate::parse(der)) certificates.push_back(certificate);
             return certificates;
         };
         const Anchors anchors{parse(roots), parse(compatibility), parse(allowed), parse(denied)};

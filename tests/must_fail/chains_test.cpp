@@ -1,0 +1,180 @@
+// Chains that must not be trusted, before the policies that the tool itself makes.
+#include <gtest/gtest.h>
+
+#include "chain_faults.h"
+#include "result_table.h"
+#include "src/messages.h"
+#include "src/satchel_internal.h"
+#include "support/controller_run.h"
+#include "support/message_capture.h"
+
+namespace pinwell {
+namespace {
+
+using test::ChainCase;
+using test::ChainPolicy;
+using trust::Scene;
+using trust::Verdict;
+
+/// The chain of one case, issued and arranged.
+Scene makeScene(const ChainCase& one) {
+    test::ChainFields fields = one.policy == ChainPolicy::ticket
+                                   ? test::ChainFields(test::TicketChain())
+                                   : test::ChainFields(test::ServerChain(trust::kHost));
+    if (one.fields) one.fields(fields);
+    Scene scene(fields);
+    if (one.arrangement) one.arrangement(scene, fields);
+    return scene;
+}
+
+trust::PolicyRef makePolicy(const ChainCase& one, trust::TrustService& service) {
+    trust::PolicyRef policy;
+    switch (one.policy) {
+        case ChainPolicy::ticket:
+            EXPECT_EQ(_satchel_create_cert_policy(&policy, service), satchel_status::kSuccess);
+            break;
+        case ChainPolicy::pinned:
+            return trust::createPinnedServerPolicy(one.host);
+        case ChainPolicy::compatibility:
+            return trust::createCompatibilityServerPolicy(one.host);
+    }
+    return policy;
+}
+
+/// Nothing when one of them cannot be read.
+std::optional<std::vector<trust::CertificateRef>> parse(const std::vector<foundation::Data>& list,
+                                                        trust::TrustService& service) {
+    std::vector<trust::CertificateRef> certificates;
+    for (const foundation::Data& der : list) {
+        certificates.push_back(service.createCertificate(der));
+        if (certificates.back() == nullptr) return std::nullopt;
+    }
+    return certificates;
+}
+
+/// As the tables write it.
+char judge(const ChainCase& one, std::string& reason) {
+    const Scene scene = makeScene(one);
+    const auto service = scene.service();
+    const auto certificates = parse(scene.list, *service);
+    if (!certificates) return 'x';
+    const trust::PolicyRef policy = makePolicy(one, *service);
+    std::shared_ptr<trust::Trust> object;
+    const trust::Status status = service->createTrust(*certificates, policy, object);
+    if (status == trust::kParameterError) return 'p';
+    EXPECT_EQ(status, trust::kSuccess);
+    auto verdict = Verdict::invalid;
+    EXPECT_EQ(object->evaluate(verdict), trust::kSuccess);
+    reason = object->copyFailureDescription().value_or("no failure");
+    return static_cast<char>('0' + static_cast<int>(verdict));
+}
+
+/// By the user alone is enough for a server, and for a ticket it is not.
+bool isGood(ChainPolicy policy, char verdict) {
+    return verdict == '4' || (verdict == '1' && policy != ChainPolicy::ticket);
+}
+
+class ChainTable : public testing::TestWithParam<ChainCase> {};
+
+TEST_P(ChainTable, HasItsVerdict) {
+    const ChainCase& one = GetParam();
+    std::string reason;
+    const char got = judge(one, reason);
+    EXPECT_EQ(got, one.expected) << one.wrong << "\n" << reason;
+    test::recordResult({"chains", one.name, one.wrong, std::string(1, one.expected), std::string(1, got),
+                        !isGood(one.policy, one.expected)});
+}
+
+std::string nameOf(const testing::TestParamInfo<ChainCase>& info) {
+    return info.param.name;
+}
+
+INSTANTIATE_TEST_SUITE_P(MustFail, ChainTable, testing::ValuesIn(test::chainCases()), nameOf);
+
+std::vector<ChainCase> casesWith(ChainPolicy policy) {
+    std::vector<ChainCase> cases = test::chainCases();
+    std::erase_if(cases, [&](const ChainCase& one) { return one.policy != policy; });
+    return cases;
+}
+
+/// What becomes of a ticket whose chain has the verdict: only 4 counts.
+class SignerTable : public testing::TestWithParam<ChainCase> {};
+
+TEST_P(SignerTable, IsTakenForVerdict4Only) {
+    const ChainCase& one = GetParam();
+    const Scene scene = makeScene(one);
+    const auto service = scene.service();
+    const auto certificates = parse(scene.list, *service);
+    ASSERT_EQ(!certificates, one.expected == 'x');
+    if (!certificates) return;
+    std::shared_ptr<trust::Trust> evaluated;
+    const trust::Status status =
+        _satchel_create_trust(*certificates, makePolicy(one, *service), &evaluated, *service);
+    EXPECT_EQ(status == satchel_status::kSuccess, one.expected == '4') << one.wrong;
+    EXPECT_EQ(evaluated != nullptr, one.expected == '4') << one.wrong;
+}
+
+INSTANTIATE_TEST_SUITE_P(MustFail, SignerTable, testing::ValuesIn(casesWith(ChainPolicy::ticket)), nameOf);
+
+/// A server's chain before the two policies that the controller tries.
+struct ServerCase {
+    ChainCase pinned;
+    char compatibility;
+
+    friend void PrintTo(const ServerCase& one, std::ostream* out) { *out << one.pinned.wrong; }
+
+    bool isAccepted() const {
+        return isGood(ChainPolicy::pinned, pinned.expected) ||
+               isGood(ChainPolicy::compatibility, compatibility);
+    }
+};
+
+std::vector<ServerCase> serverCases() {
+    const std::vector<ChainCase> pinned = casesWith(ChainPolicy::pinned);
+    const std::vector<ChainCase> compatibility = casesWith(ChainPolicy::compatibility);
+    std::vector<ServerCase> cases;
+    for (std::size_t i = 0; i < pinned.size(); ++i) {
+        cases.push_back({pinned.at(i), compatibility.at(i).expected});
+        std::string& name = cases.back().pinned.name;
+        name.resize(name.rfind('_'));
+    }
+    return cases;
+}
+
+/// What the controller answers to a server of that chain. One whose chain makes no trust object gets no
+/// challenge.
+bool letsIn(const Scene& scene, trust::TrustService& service, const ChainCase& one) {
+    const auto certificates = parse(scene.list, service);
+    std::shared_ptr<trust::Trust> object;
+    if (!certificates ||
+        service.createTrust(*certificates, makePolicy(one, service), object) != trust::kSuccess)
+        return false;
+    test::ControllerRun run;
+    const test::MessageCapture output(kVerbosityNormal);
+    const auto session = run.platform.https.ephemeralSession(run.controller);
+    std::optional<https::Disposition> given;
+    run.controller.didReceiveChallenge(*session, {one.host, https::AuthenticationMethod::serverTrust, object},
+                                       [&](https::Disposition disposition,
+                                           const std::optional<https::Credential>&) { given = disposition; });
+    EXPECT_TRUE(given == https::Disposition::useCredential || given == https::Disposition::cancelChallenge);
+    return given == https::Disposition::useCredential;
+}
+
+class ServerTable : public testing::TestWithParam<ServerCase> {};
+
+TEST_P(ServerTable, IsLetInByEitherPolicyOrNotAtAll) {
+    const ServerCase& one = GetParam();
+    const Scene scene = makeScene(one.pinned);
+    const auto service = scene.service();
+    const bool isLetIn = letsIn(scene, *service, one.pinned);
+    EXPECT_EQ(isLetIn, one.isAccepted()) << one.pinned.wrong;
+    const auto text = [](bool accepted) { return std::string(accepted ? "accepted" : "refused"); };
+    test::recordResult({"servers", one.pinned.name, one.pinned.wrong, text(one.isAccepted()), text(isLetIn),
+                        !one.isAccepted()});
+}
+
+INSTANTIATE_TEST_SUITE_P(MustFail, ServerTable, testing::ValuesIn(serverCases()),
+                         [](const auto& tested) { return tested.param.pinned.name; });
+
+}  // namespace
+}  // namespace pinwell
