@@ -204,6 +204,30 @@ void makeArchives(const std::string& corpus) {
         .add("record", makeTrailer({}));
 }
 
+// A dictionary of one key, whose value is an array of an integer, a boolean, a real, a date, text in UTF-16,
+// and text whose length follows.
+Data binaryPropertyList() {
+    const std::vector<std::string> objects = {"\xD1\x01\x02",
+                                              "\x51\x61",
+                                              "\xA6\x03\x04\x05\x06\x07\x08",
+                                              "\x10\x7F",
+                                              "\x09",
+                                              "\x23" + std::string(8, '\x3F'),
+                                              "\x33" + std::string(8, '\x41'),
+                                              "\x61\x20\xAC",
+                                              "\x5F\x10\x01z"};
+    foundation::ByteWriter writer;
+    foundation::ByteWriter offsets;
+    writer.text("bplist00");
+    for (const std::string& object : objects) {
+        offsets.u8(static_cast<std::uint8_t>(writer.size()));
+        writer.text(object);
+    }
+    const std::size_t table = writer.size();
+    writer.bytes(offsets.data()).zeros(6).u8(1).u8(1);
+    return writer.be64(objects.size()).be64(0).be64(table).data();
+}
+
 void makeDocuments(const std::string& corpus) {
     using foundation::Array;
     using foundation::Dictionary;
@@ -212,12 +236,7 @@ void makeDocuments(const std::string& corpus) {
                                 {"data", toData("data")},
                                 {"empty", Dictionary{}},
                                 {"text", "<&>\u00E9"}};
-    const std::string binary(
-        "bplist00\xD1\x01\x02"
-        "Aa"
-        "\xA2\x03\x04\x10\x7F\x09\x08\x0B\x0D\x10\x12"
-        "\0\0\0\0\0\0\x01\x01\0\0\0\0\0\0\0\x05\0\0\0\0\0\0\0\0\0\0\0\0\0\0\0\x13",
-        51);
+    const Data binary = binaryPropertyList();
     Seeds(corpus, "property_list")
         .add("xml", *foundation::serializePropertyList(dictionary))
         .add("kinds",
