@@ -1,0 +1,116 @@
+// Tickets that must not be taken, on each kind of artefact and by each way that they can come.
+#include <gtest/gtest.h>
+
+#include "result_table.h"
+#include "support/controller_run.h"
+#include "ticket_faults.h"
+
+namespace pinwell::test {
+namespace {
+
+const IssuedChain& signers() {
+    static const IssuedChain chain = TicketChain().issue();
+    return chain;
+}
+
+std::string answerWith(const Data& ticket) {
+    return ControllerRun::inlineAnswer(ticket);
+}
+
+/// How the ticket comes.
+enum class Route {
+    stapled,   // validate: the ticket on the artefact is at fault, the service's is good
+    answered,  // validate: the ticket on the artefact is good, the service's is at fault
+    stapling,  // staple: the service's is at fault
+};
+
+struct TicketCase {
+    TicketFault fault;
+    Subject subject;
+    Route route;
+
+    std::string name() const {
+        static const char* const routes[] = {"stapled", "answered", "stapling"};
+        return std::string(fault.name) + "_" + subject.name + "_" + routes[static_cast<std::size_t>(route)];
+    }
+    friend void PrintTo(const TicketCase& one, std::ostream* out) { *out << one.fault.wrong; }
+};
+
+std::vector<TicketCase> ticketCases() {
+    std::vector<TicketCase> cases;
+    for (const TicketFault& fault : ticketFaults())
+        for (const Subject& subject : subjects())
+            for (const Route route : {Route::stapled, Route::answered, Route::stapling})
+                cases.push_back({fault, subject, route});
+    return cases;
+}
+
+class TicketTable : public testing::TestWithParam<TicketCase> {};
+
+TEST_P(TicketTable, EndsWithItsExitCode) {
+    const TicketCase& one = GetParam();
+    SignerAnchors anchors{{signers().root.der}, {}, {}, {}};
+    if (one.fault.anchors) one.fault.anchors(anchors);
+    ToolRun tool(anchors);
+    const Data good = goodTicket(one.subject, signers());
+    const Data bad = one.fault.ticket(one.subject, signers());
+    const std::string path = tool.path(one.subject.fileName);
+    switch (one.route) {
+        case Route::stapled:
+            one.subject.write(path, bad);
+            break;
+        case Route::answered:
+            one.subject.write(path, good);
+            break;
+        case Route::stapling:
+            one.subject.write(path, std::nullopt);
+            break;
+    }
+    const std::string before = contentsOf(path);
+    const int got = one.route == Route::stapling   ? tool.staple(path, answerWith(bad))
+                    : one.route == Route::answered ? tool.validate(path, answerWith(bad))
+                                                   : tool.validate(path, answerWith(good));
+    EXPECT_EQ(got, one.fault.exit) << one.fault.wrong;
+    EXPECT_NE(got, 0) << one.fault.wrong;
+    EXPECT_EQ(contentsOf(path), before) << "a ticket that is refused changes nothing";
+    recordResult(
+        {"tickets", one.name(), one.fault.wrong, std::to_string(one.fault.exit), std::to_string(got)});
+}
+
+INSTANTIATE_TEST_SUITE_P(MustFail, TicketTable, testing::ValuesIn(ticketCases()),
+                         [](const auto& tested) { return tested.param.name(); });
+
+/// What the tables stand on: with nothing wrong, each kind is let in on each way.
+class GoodTicket : public testing::TestWithParam<Subject> {};
+
+TEST_P(GoodTicket, IsTaken) {
+    const Subject& subject = GetParam();
+    ToolRun tool({{signers().root.der}, {}, {}, {}});
+    const std::string path = tool.path(subject.fileName);
+    const std::string answer = answerWith(goodTicket(subject, signers()));
+    subject.write(path, std::nullopt);
+    EXPECT_EQ(tool.validate(path, answer), 65) << "nothing is stapled to it yet";
+    EXPECT_EQ(tool.staple(path, answer), 0);
+    EXPECT_EQ(tool.validate(path, answer), 0);
+}
+
+TEST_P(GoodTicket, ThatIsPutBackAfterItsRevocationPassesOfflineAndNotOnline) {
+    const Subject& subject = GetParam();
+    ToolRun tool({{signers().root.der}, {}, {}, {}});
+    const std::string path = tool.path(subject.fileName);
+    const Data revoked = SatchelBuilder::of(signers(), subject.payload().revoked().build()).build();
+    subject.write(path, revoked);
+    EXPECT_FALSE(tool.passesOffline(path));
+    EXPECT_EQ(tool.validate(path, answerWith(revoked)), 77);
+
+    subject.write(path, goodTicket(subject, signers()));
+    EXPECT_TRUE(tool.passesOffline(path));
+    EXPECT_EQ(tool.validate(path, answerWith(revoked)), 77);
+    EXPECT_EQ(tool.staple(path, answerWith(revoked)), 77);
+}
+
+INSTANTIATE_TEST_SUITE_P(MustFail, GoodTicket, testing::ValuesIn(subjects()),
+                         [](const auto& tested) { return tested.param.name; });
+
+}  // namespace
+}  // namespace pinwell::test
