@@ -109,7 +109,7 @@ std::vector<SignatureCase> writtenCases() {
         {"RNegative", "r lacks the zero that makes it positive", withR(integer(kR))},
         {"RMinusOne", "r is -1", withR(integer("FF"))},
         {"SMinusOne", "s is -1", withS(integer("FF"))},
-        {"SNegated", "s is -s", withS(integer("FE60BEEC8BD5D4EB42DA6D94B639B6EAA0D98D9F2C7EB4B3F337BDAF1B90FF7D"))},
+        {"SNegated", "s is -s", withS(integer("FE60BEEC8BD5D4EB42DA6D94B639B6EAA0D9819F2C7EB4B3F337BDAF1B90FF7D"))},
         {"RZeroTooMany", "a zero too many before r", withR(integer("0000" + kR))},
         {"SZeroTooMany", "a zero too many before s", withS(integer("00" + kS))},
         {"SThreeZeros", "three zeros before s", withS(integer("000000" + kS))},

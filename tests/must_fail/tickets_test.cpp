@@ -1,6 +1,8 @@
 // Tickets that must not be taken, on each kind of artefact and by each way that they can come.
 #include <gtest/gtest.h>
 
+#include "artefact_faults.h"
+#include "foundation/base64.h"
 #include "result_table.h"
 #include "support/controller_run.h"
 #include "ticket_faults.h"
@@ -79,6 +81,46 @@ TEST_P(TicketTable, EndsWithItsExitCode) {
 
 INSTANTIATE_TEST_SUITE_P(MustFail, TicketTable, testing::ValuesIn(ticketCases()),
                          [](const auto& tested) { return tested.param.name(); });
+
+class ArtefactTable : public testing::TestWithParam<ArtefactFault> {};
+
+TEST_P(ArtefactTable, EndsWithItsExitCode) {
+    const ArtefactFault& fault = GetParam();
+    const Subject& subject = subjectNamed(fault.subject);
+    ToolRun tool({{signers().root.der}, {}, {}, {}});
+    const std::string path = tool.path(subject.fileName);
+    fault.write(path, signers());
+    const std::string before = contentsOf(path);
+    const int got = tool.validate(path, answerWith(goodTicket(subject, signers())));
+    EXPECT_EQ(got, fault.exit) << fault.wrong;
+    EXPECT_EQ(contentsOf(path), before);
+    recordResult({"artefacts", fault.name, fault.wrong, std::to_string(fault.exit), std::to_string(got),
+                  fault.exit != 0});
+}
+
+INSTANTIATE_TEST_SUITE_P(MustFail, ArtefactTable, testing::ValuesIn(artefactFaults()),
+                         [](const auto& tested) { return tested.param.name; });
+
+class AnswerTable : public testing::TestWithParam<AnswerFault> {};
+
+TEST_P(AnswerTable, EndsWithItsExitCode) {
+    const AnswerFault& fault = GetParam();
+    const Subject& subject = subjectNamed("package");
+    ToolRun tool({{signers().root.der}, {}, {}, {}});
+    const std::string path = tool.path(subject.fileName);
+    subject.write(path, goodTicket(subject, signers()));
+    const int got = tool.validate(path, fault.body);
+    EXPECT_EQ(got, fault.exit) << fault.wrong;
+    EXPECT_NE(got, 0) << fault.wrong;
+    recordResult({"answers", fault.name, fault.wrong, std::to_string(fault.exit), std::to_string(got)});
+}
+
+std::string goodTicketInBase64() {
+    return foundation::encodeBase64(goodTicket(subjectNamed("package"), signers()));
+}
+
+INSTANTIATE_TEST_SUITE_P(MustFail, AnswerTable, testing::ValuesIn(answerFaults(goodTicketInBase64())),
+                         [](const auto& tested) { return tested.param.name; });
 
 /// What the tables stand on: with nothing wrong, each kind is let in on each way.
 class GoodTicket : public testing::TestWithParam<Subject> {};
