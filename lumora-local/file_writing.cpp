@@ -21,6 +21,15 @@ using foundation::ByteView;
 using foundation::FileDescriptor;
 using foundation::format;
 
+/// Makes a call again as long as a signal interrupts it.
+template <class Call>
+auto uninterrupted(Call call) {
+    for (;;) {
+        const auto answer = call();
+        if (answer >= 0 || errno != EINTR) return answer;
+    }
+}
+
 Failure failureFromErrno(int exitStatus, std::string_view action, const std::string& path) {
     const std::string reason = std::generic_category().message(errno);
     return {exitStatus, format("cannot %@ %@: %@", action, path, reason)};
@@ -28,12 +37,13 @@ Failure failureFromErrno(int exitStatus, std::string_view action, const std::str
 
 void writeAll(int descriptor, ByteView contents, const std::string& path) {
     while (!contents.empty()) {
-        const ssize_t written = ::write(descriptor, contents.data(), contents.size());
-        if (written < 0 && errno == EINTR) continue;
+        const ssize_t written =
+            uninterrupted([&] { return ::write(descriptor, contents.data(), contents.size()); });
         if (written < 0) throw failureFromErrno(EX_IOERR, "write", path);
         contents = contents.subspan(static_cast<std::size_t>(written));
     }
-    if (::fsync(descriptor) != 0) throw failureFromErrno(EX_IOERR, "flush", path);
+    if (uninterrupted([&] { return ::fsync(descriptor); }) != 0)
+        throw failureFromErrno(EX_IOERR, "flush", path);
 }
 
 std::string parentOf(const std::string& path) {
@@ -49,10 +59,15 @@ std::string withoutTrailingSlashes(std::string path) {
 }  // namespace
 
 void writeNewFile(const std::string& path, ByteView contents, mode_t mode) {
-    const FileDescriptor file(
-        ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, mode));
+    constexpr int kFlags = O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC;
+    const FileDescriptor file(uninterrupted([&] { return ::open(path.c_str(), kFlags, mode); }));
     if (!file) throw failureFromErrno(EX_CANTCREAT, "create", path);
-    writeAll(file.get(), contents, path);
+    try {
+        writeAll(file.get(), contents, path);
+    } catch (const Failure&) {
+        ::unlink(path.c_str());
+        throw;
+    }
 }
 
 void replaceFile(const std::string& path, ByteView contents, mode_t mode) {
@@ -74,10 +89,12 @@ void makeDirectory(const std::string& path, mode_t mode) {
 }
 
 void flushDirectory(const std::string& path) {
-    const FileDescriptor directory(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    constexpr int kFlags = O_RDONLY | O_DIRECTORY | O_CLOEXEC;
+    const FileDescriptor directory(uninterrupted([&] { return ::open(path.c_str(), kFlags); }));
     if (!directory) throw failureFromErrno(EX_IOERR, "open", path);
     // Some file systems have nothing to flush for a directory and say so.
-    if (::fsync(directory.get()) != 0 && errno != EINVAL) throw failureFromErrno(EX_IOERR, "flush", path);
+    if (uninterrupted([&] { return ::fsync(directory.get()); }) != 0 && errno != EINVAL)
+        throw failureFromErrno(EX_IOERR, "flush", path);
 }
 
 std::string temporarySiblingOf(const std::string& path) {
@@ -107,8 +124,9 @@ void PendingDirectory::publish() {
     if (std::rename(path_.c_str(), finalPath_.c_str()) != 0) {
         throw failureFromErrno(EX_CANTCREAT, "create", finalPath_);
     }
-    published_ = true;
+    path_ = finalPath_;  // what is removed again when it cannot be flushed
     flushDirectory(parentOf(finalPath_));
+    published_ = true;
 }
 
 }  // namespace pinwell::lumora

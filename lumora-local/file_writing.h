@@ -10,7 +10,8 @@
 namespace pinwell::lumora {
 
 /// Makes a file that must not exist yet, flushed to the disk before this returns. `mode` is subject to the
-/// umask. Throws Failure (EX_CANTCREAT when it cannot be made, EX_IOERR when it cannot be written).
+/// umask. Throws Failure (EX_CANTCREAT when it cannot be made, EX_IOERR when it cannot be written), and then
+/// no file is left that was not there before.
 void writeNewFile(const std::string& path, foundation::ByteView contents, mode_t mode);
 
 /// Puts `contents` in the place of whatever file stands at `path`, by one rename of a flushed sibling.
@@ -39,8 +40,9 @@ class PendingDirectory {
     /// Where to build, until it is published.
     const std::string& path() const noexcept { return path_; }
 
-    /// Moves it to its final place in one step. Throws Failure when that has been taken meanwhile: a rename
-    /// of a directory replaces nothing but an empty directory.
+    /// Moves it to its final place in one step. Throws Failure when that has been taken meanwhile, for a
+    /// rename of a directory replaces nothing but an empty directory, or when the move cannot be made
+    /// durable.
     void publish();
 
   private:

@@ -2,9 +2,11 @@
 
 #include <filesystem>
 #include <system_error>
+#include <utility>
 
 #include "foundation/format.h"
 #include "lumora-local/failure.h"
+#include "lumora-local/file_writing.h"
 #include "lumora-local/sample_bundle.h"
 #include "lumora-local/sample_disk_image.h"
 #include "lumora-local/sample_package.h"
@@ -17,6 +19,25 @@ constexpr const char* kSignedImage = "Sample.dmg";
 constexpr const char* kUnsignedImage = "Unsigned.dmg";
 constexpr const char* kPackage = "Sample.pkg";
 
+/// What has been written of the set, which is removed again unless it is complete: half a set would be in the
+/// way of the next try.
+class PendingSet {
+  public:
+    PendingSet() = default;
+    ~PendingSet() {
+        std::error_code ignored;
+        for (const std::string& path : paths_) std::filesystem::remove_all(path, ignored);
+    }
+    PendingSet(const PendingSet&) = delete;
+    PendingSet& operator=(const PendingSet&) = delete;
+
+    void add(std::string path) { paths_.push_back(std::move(path)); }
+    std::vector<std::string> complete() && { return std::exchange(paths_, {}); }
+
+  private:
+    std::vector<std::string> paths_;
+};
+
 }  // namespace
 
 std::vector<std::string> writeSamples(const std::string& directory, foundation::Date now) {
@@ -24,16 +45,18 @@ std::vector<std::string> writeSamples(const std::string& directory, foundation::
     std::filesystem::create_directories(directory, error);
     if (error)
         throw Failure(EX_CANTCREAT, foundation::format("cannot create %@: %@", directory, error.message()));
-    // Half a set would be in the way of the next try.
     for (const char* const name : {kApplication, kSignedImage, kUnsignedImage, kPackage}) {
         const std::string path = directory + "/" + name;
         if (std::filesystem::symlink_status(path, error).type() != std::filesystem::file_type::not_found)
             throw Failure(EX_CANTCREAT, foundation::format("%@ exists", path));
     }
-    return {writeSampleApplication(directory),
-            writeSampleDiskImage(directory, kSignedImage, ImageSignature::adHoc),
-            writeSampleDiskImage(directory, kUnsignedImage, ImageSignature::none),
-            writeSamplePackage(directory, kPackage, now)};
+    PendingSet set;
+    set.add(writeSampleApplication(directory));
+    set.add(writeSampleDiskImage(directory, kSignedImage, ImageSignature::adHoc));
+    set.add(writeSampleDiskImage(directory, kUnsignedImage, ImageSignature::none));
+    set.add(writeSamplePackage(directory, kPackage, now));
+    flushDirectory(directory);
+    return std::move(set).complete();
 }
 
 }  // namespace pinwell::lumora

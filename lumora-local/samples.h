@@ -16,7 +16,8 @@ namespace pinwell::lumora {
 ///   Unsigned.dmg   the same image without one
 ///   Sample.pkg     a signed flat package (sample_package.h), signed at `now`
 ///
-/// Nothing that exists is overwritten, and when one of them exists none is written. Throws Failure.
+/// Nothing that exists is overwritten. When one of them exists or cannot be written, none is there afterwards
+/// that was not there before. Throws Failure.
 std::vector<std::string> writeSamples(const std::string& directory, foundation::Date now);
 
 }  // namespace pinwell::lumora

@@ -1,0 +1,111 @@
+// Whatever call fails: what was to be written is there or is not, and nothing half made is in the way of the
+// next try.
+#include <gmock/gmock.h>
+
+#include <cerrno>
+#include <filesystem>
+#include <functional>
+#include <set>
+#include <string>
+
+#include "lumora-local/failure.h"
+#include "lumora-local/file_writing.h"
+#include "lumora-local/samples.h"
+#include "support/failing_calls.h"
+#include "support/temporary_directory.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using pinwell::test::TemporaryDirectory;
+using pinwell::test::Trouble;
+using testing::IsSupersetOf;
+
+constexpr foundation::Date kNow{1'795'000'000};
+
+std::set<std::string> namesIn(const std::string& directory) {
+    std::set<std::string> names;
+    for (const auto& entry : std::filesystem::directory_iterator(directory))
+        names.insert(entry.path().filename().string());
+    return names;
+}
+
+using MakeTrouble = std::function<Trouble(std::size_t number)>;
+
+/// Writes once for every call that can fail, into a directory of its own. Answers the names of those calls.
+std::set<std::string> failEachCall(const MakeTrouble& makeTrouble,
+                                   const std::function<void(const std::string& directory)>& write,
+                                   const std::set<std::string>& wanted) {
+    std::set<std::string> calls;
+    for (std::size_t number = 0;; ++number) {
+        const TemporaryDirectory directory;
+        bool failed = false;
+        std::string call;
+        {
+            const Trouble trouble = makeTrouble(number);
+            try {
+                write(directory.path());
+            } catch (const Failure&) {
+                failed = true;
+            }
+            call = trouble.failedCall();
+        }
+        const auto names = namesIn(directory.path());
+        EXPECT_EQ(names, failed ? std::set<std::string>{} : wanted)
+            << "after call " << number << ", " << call;
+        if (call.empty()) {
+            EXPECT_FALSE(failed) << "failed without a cause";
+            return calls;
+        }
+        calls.insert(call);
+    }
+}
+
+void writeAllSamples(const std::string& directory) {
+    writeSamples(directory, kNow);
+}
+const std::set<std::string> kAllSamples{"Sample.app", "Sample.dmg", "Sample.pkg", "Unsigned.dmg"};
+
+TEST(Samples, AreAllThereOrNoneWhicheverCallFails) {
+    EXPECT_THAT(failEachCall([](std::size_t number) { return Trouble::atCall(number, EIO); }, writeAllSamples,
+                             kAllSamples),
+                IsSupersetOf({"open", "write", "fsync"}));
+}
+
+TEST(Samples, AreWrittenThroughInterruptions) {
+    const TemporaryDirectory directory;
+    {
+        const Trouble trouble = Trouble::interruptions();
+        writeAllSamples(directory.path());
+    }
+    EXPECT_EQ(namesIn(directory.path()), kAllSamples);
+}
+
+TEST(NewFile, IsNotLeftBehindHalfWritten) {
+    const auto write = [](const std::string& directory) {
+        writeNewFile(directory + "/file", foundation::toData("contents"), 0600);
+    };
+    EXPECT_THAT(
+        failEachCall([](std::size_t number) { return Trouble::fromCallOn(number, ENOSPC); }, write, {"file"}),
+        IsSupersetOf({"write", "fsync"}));
+}
+
+TEST(NewFile, ThatWasThereBeforeIsNotRemoved) {
+    const TemporaryDirectory directory;
+    pinwell::test::writeFile(directory / "file", "mine");
+    EXPECT_THROW(writeNewFile(directory / "file", foundation::toData("contents"), 0600), Failure);
+    EXPECT_EQ(pinwell::test::readFile(directory / "file"), "mine");
+}
+
+TEST(PendingDirectory, IsGoneWhenItCannotBePublished) {
+    const auto write = [](const std::string& directory) {
+        PendingDirectory pending(directory + "/new", 0700);
+        writeNewFile(pending.path() + "/file", foundation::toData("contents"), 0600);
+        pending.publish();
+    };
+    EXPECT_THAT(failEachCall([](std::size_t number) { return Trouble::atCall(number, EIO); }, write, {"new"}),
+                IsSupersetOf({"open", "write", "fsync"}));
+}
+
+}  // namespace
+}  // namespace pinwell::lumora
