@@ -98,6 +98,8 @@ class EndToEndTest : public testing::Test {
                                 HostileServerOptions options = {});
     /// Every request is answered so.
     void serve(Response response);
+    /// Nothing but refusals from now on; the server's threads are done with what the handler before refers to.
+    void serveNoMore() { serve({.status = 503}); }
     void serveTicket(const Data& ticket) { serve(answer(inlineRecord(ticket))); }
     /// The lookup is answered with this record; what comes after it, with `asset`.
     void serveAsset(const std::string& record, const Response& asset);

@@ -33,6 +33,7 @@ class SharedArtefact : public EndToEndTest, public testing::WithParamInterface<A
                                           artefact.path +
                                               " has changed since it was read. Nothing was written to it.",
                                           stapleFailed(73))));
+        serveNoMore();
     }
 
     Artefact artefact = [this] {

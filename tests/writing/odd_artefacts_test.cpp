@@ -323,6 +323,7 @@ TEST_F(OddArtefact, AFileThatGrowsWhileItIsStapledIsRefused) {
         return answer(inlineRecord(served));
     });
     EXPECT_EQ(pinwell({"staple", image.path}).exitStatus, 73);
+    serveNoMore();
     EXPECT_TRUE(readFile(image.path) == image.contents + std::string(1, '\0'));
 }
 
