@@ -12,6 +12,18 @@ std::string_view trimmed(std::string_view text) {
     return text.substr(0, text.find_last_not_of(kBlank) + 1);
 }
 
+// "4", or "4, 4" of a sender, or something on the way, that wrote the field twice.
+bool isOneLength(std::string_view list) {
+    const std::string_view first = trimmed(list.substr(0, list.find(',')));
+    if (first.empty() || first.find_first_not_of("0123456789") != std::string_view::npos) return false;
+    while (true) {
+        const std::size_t comma = list.find(',');
+        if (trimmed(list.substr(0, comma)) != first) return false;
+        if (comma == std::string_view::npos) return true;
+        list.remove_prefix(comma + 1);
+    }
+}
+
 }  // namespace
 
 bool ResponseHead::addLine(std::string_view line) {
@@ -28,6 +40,15 @@ bool ResponseHead::addLine(std::string_view line) {
     }
     addField(line);
     return ++fields_ <= maximumFields_;
+}
+
+bool ResponseHead::hasPlainFraming() const {
+    const auto length = headers_.find("Content-Length");
+    if (length != headers_.end() && !isOneLength(length->second)) return false;
+    const auto coding = headers_.find("Transfer-Encoding");
+    if (coding == headers_.end()) return true;
+    const CaseInsensitiveLess less;
+    return !less(coding->second, "chunked") && !less("chunked", coding->second);
 }
 
 // "HTTP/1.1 200 OK", "HTTP/2 200"

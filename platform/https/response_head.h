@@ -19,6 +19,10 @@ class ResponseHead {
     /// The empty line of a final response was seen.
     bool isComplete() const noexcept { return complete_; }
 
+    /// Whether it says in one way only where the body ends (RFC 9112, section 6.3): with lengths that are all
+    /// the same number, with the chunked coding alone, or not at all.
+    bool hasPlainFraming() const;
+
     int status() const noexcept { return status_; }
     const Headers& headers() const noexcept { return headers_; }
 

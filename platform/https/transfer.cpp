@@ -274,10 +274,7 @@ class Exchange {
         curl_easy_getinfo(easy_.get(), CURLINFO_HTTP_VERSION, &version);
         if (version != CURL_HTTP_VERSION_1_0 && version != CURL_HTTP_VERSION_1_1) return false;
         if (request_.method == "HEAD" || head_.status() == 204 || head_.status() == 304) return false;
-        const auto coding = head_.headers().find("Transfer-Encoding");
-        if (coding == head_.headers().end()) return !head_.headers().contains("Content-Length");
-        const CaseInsensitiveLess less;
-        return less(coding->second, "chunked") || less("chunked", coding->second);
+        return !head_.headers().contains("Transfer-Encoding") && !head_.headers().contains("Content-Length");
     }
 
     // The first failure is the cause; what the library reports after it is a consequence.
@@ -343,8 +340,14 @@ class Exchange {
 
     bool takeHeader(std::string_view line) {
         lastActivity_ = context_.options.now();
-        if (head_.addLine(line)) return true;
-        fail(URLErrorCode::tooLarge, "the answer's header is larger than allowed");
+        if (!head_.addLine(line)) {
+            fail(URLErrorCode::tooLarge, "the answer's header is larger than allowed");
+            return false;
+        }
+        // The library takes the last of several lengths, the digits that a malformed one begins with, and
+        // unpacks a transfer whose compression nobody asked for, however much that makes of it.
+        if (!head_.isComplete() || head_.hasPlainFraming()) return true;
+        fail(URLErrorCode::badServerResponse, "where the answer ends is not said in one plain way");
         return false;
     }
 

@@ -22,7 +22,8 @@ constexpr std::array kFailures{
                     "the transfer library lacks what is needed"},
     TransferFailure{CURLE_UNKNOWN_OPTION, Code::invalidConfiguration,
                     "the transfer library lacks what is needed"},
-    TransferFailure{CURLE_BAD_FUNCTION_ARGUMENT, Code::invalidConfiguration, "the request is malformed"},
+    // A field without a colon; the request's own were looked at before.
+    TransferFailure{CURLE_BAD_FUNCTION_ARGUMENT, Code::badServerResponse, "the answer's header is malformed"},
     TransferFailure{CURLE_COULDNT_RESOLVE_HOST, Code::cannotFindHost, "the host name could not be resolved"},
     TransferFailure{CURLE_COULDNT_RESOLVE_PROXY, Code::proxyFailed, "the proxy's name could not be resolved"},
     TransferFailure{CURLE_PROXY, Code::proxyFailed, "the proxy refused"},
