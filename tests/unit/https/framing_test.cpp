@@ -68,6 +68,14 @@ TEST_F(Framing, TransferCodingsOtherThanChunkedAreRefused) {
             coding);
 }
 
+TEST_F(Framing, ACompressedTransferIsNotUnpacked) {
+    using namespace std::string_literals;
+    expectRefused(
+        fetchAnswer("Transfer-Encoding: gzip\r\n",
+                    "\x1f\x8b\x08\0\0\0\0\0\0\x03\x4b\xca\x4f\xa9\x04\0\xb2\x0b\xa8\xdb\x04\0\0\0"s),
+        "gzip of \"body\"");
+}
+
 TEST_F(Framing, TransferCodingsInTwoFieldsAreRefused) {
     expectRefused(
         fetchAnswer("Transfer-Encoding: gzip\r\nTransfer-Encoding: chunked\r\n", "4\r\nbody\r\n0\r\n\r\n"),
