@@ -129,6 +129,23 @@ TEST_F(Transport, AnAnswerWhoseLastChunkIsMissingIsNone) {
                 FailedOnTheWay(kConnectionLost));
 }
 
+TEST_F(Transport, AnAnswerThatDoesNotSayPlainlyWhereItEndsIsRefused) {
+    for (const std::string fields :
+         {"Content-Length: 4\r\nContent-Length: 9\r\n", "Content-Length: -1\r\n", "Content-Length: 4, 9\r\n",
+          "Transfer-Encoding: gzip\r\n", "Transfer-Encoding: gzip, chunked\r\n"}) {
+        EXPECT_THAT(
+            stapleFrom(Script().readRequest().send("HTTP/1.1 200 OK\r\n" + fields + "\r\n" + body).close()),
+            FailedOnTheWay(kAnyCode))
+            << fields;
+        EXPECT_EQ(stapled(), std::nullopt);
+    }
+    EXPECT_EQ(service().requests().size(), 5U);
+}
+
+TEST_F(Transport, AnAnswerOfHTTP10IsAnAnswer) {
+    EXPECT_THAT(stapleFrom(Script().readRequest().send("HTTP/1.0 200 OK\r\n\r\n" + body).close()), Worked());
+}
+
 TEST_F(Transport, AnInformationalAnswerComesBeforeTheAnswer) {
     EXPECT_THAT(
         stapleFrom(Script().readRequest().send("HTTP/1.1 103 Early Hints\r\nX-Ostrel-Request-UUID: EARLY\r\n"
