@@ -1,0 +1,47 @@
+// What a certificate says, for showing it to people. Nothing here judges it.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "foundation/bytes.h"
+#include "foundation/date.h"
+
+namespace pinwell::trust {
+
+/// Names are in the string form of RFC 4514 (last attribute first), control characters escaped, in UTF-8.
+struct CertificateDescription {
+    struct Extension {
+        std::string oid;  // dotted
+        bool critical = false;
+        bool malformed = false;  // cannot be read, or occurs more than once
+    };
+
+    std::string subject;
+    std::string issuer;
+    std::string summary;       // as Certificate::subjectSummary
+    std::string serialNumber;  // hexadecimal, lower case, with a minus sign when it is negative
+    foundation::Date notBefore;
+    foundation::Date notAfter;
+
+    std::string keyType;  // "EC", "RSA", OpenSSL's name for any other; empty when the key cannot be read
+    int keyBits = 0;
+    std::string curve;               // OpenSSL's name; of an elliptic-curve key alone
+    std::string signatureAlgorithm;  // OpenSSL's long name, or a dotted OID
+
+    bool isSelfIssued = false;
+    bool isCertificateAuthority = false;
+    std::vector<Extension> extensions;  // in the certificate's order
+
+    foundation::Data sha1Fingerprint;
+    foundation::Data sha256Fingerprint;
+    std::optional<foundation::Data> subjectKeyIdentifier;
+    std::optional<foundation::Data> authorityKeyIdentifier;
+};
+
+/// Nothing unless `der` is exactly one certificate that TrustService::createCertificate would take.
+std::optional<CertificateDescription> describeCertificate(foundation::ByteView der);
+
+}  // namespace pinwell::trust
