@@ -31,7 +31,9 @@ std::optional<Data> readSignatureFile(const std::string& path) {
     }
 }
 
-std::optional<CodeSignature> readSeparateSignature(const std::string& directory) {
+}  // namespace
+
+std::optional<SignatureComponents> componentsOfSeparateFiles(const std::string& directory) {
     std::optional<Data> codeDirectory = readSignatureFile(directory + "/CodeDirectory");
     if (!codeDirectory) return std::nullopt;
     SignatureComponents components;
@@ -40,14 +42,13 @@ std::optional<CodeSignature> readSeparateSignature(const std::string& directory)
         components.blobs.emplace(kSlotRequirements, std::move(*requirements));
     }
     components.cms = readSignatureFile(directory + "/CodeSignature").value_or(Data());
-    return CodeSignature::parse(std::move(components));
+    return components;
 }
 
-}  // namespace
-
-FileCode::FileCode(CodeKind kind, std::unique_ptr<ByteSource> source, std::optional<DiskImageTrailer> trailer,
-                   std::string signatureDirectory)
+FileCode::FileCode(CodeKind kind, std::string file, std::unique_ptr<ByteSource> source,
+                   std::optional<DiskImageTrailer> trailer, std::string signatureDirectory)
     : kind_(kind),
+      file_(std::move(file)),
       source_(std::move(source)),
       trailer_(std::move(trailer)),
       signatureDirectory_(std::move(signatureDirectory)) {}
@@ -71,13 +72,24 @@ std::shared_ptr<FileCode> FileCode::atPath(const std::string& path, const MainEx
     }
     std::string signatureDirectory = bundle ? path + "/Contents/_CodeSignature" : std::string();
     return std::shared_ptr<FileCode>(
-        new FileCode(kind, std::move(source), std::move(trailer), std::move(signatureDirectory)));
+        new FileCode(kind, *file, std::move(source), std::move(trailer), std::move(signatureDirectory)));
+}
+
+SignatureComponents FileCode::completed(SignatureComponents components) const {
+    if (trailer_) components.blobs.emplace(kSlotTrailer, trailer_->canonicalBytes());
+    return components;
 }
 
 std::optional<CodeSignature> FileCode::signatureFrom(ByteView superblob) const {
-    SignatureComponents components = componentsOfSuperBlob(superblob);
-    if (trailer_) components.blobs.emplace(kSlotTrailer, trailer_->canonicalBytes());
-    return CodeSignature::parse(std::move(components));
+    return CodeSignature::parse(completed(componentsOfSuperBlob(superblob)));
+}
+
+std::optional<FileRange> FileCode::diskImageSignature() const {
+    const std::optional<FileRange> area = trailer_ ? trailer_->signature() : std::nullopt;
+    if (area && (area->offset > trailer_->offset() || area->length > trailer_->offset() - area->offset)) {
+        refuse("the signature reaches into the disk image's trailer");
+    }
+    return area;
 }
 
 std::optional<CodeSignature> FileCode::readSignature() const {
@@ -85,14 +97,12 @@ std::optional<CodeSignature> FileCode::readSignature() const {
     switch (kind_) {
         case CodeKind::opaqueFile:
             return std::nullopt;
-        case CodeKind::separatelySigned:
-            return readSeparateSignature(signatureDirectory_);
+        case CodeKind::separatelySigned: {
+            std::optional<SignatureComponents> components = componentsOfSeparateFiles(signatureDirectory_);
+            return components ? CodeSignature::parse(*std::move(components)) : std::nullopt;
+        }
         case CodeKind::diskImage:
-            area = trailer_->signature();
-            if (area &&
-                (area->offset > trailer_->offset() || area->length > trailer_->offset() - area->offset)) {
-                refuse("the signature reaches into the disk image's trailer");
-            }
+            area = diskImageSignature();
             break;
         case CodeKind::executableImage:
             area = findImageSignature(*source_, preferredSlice(readSlices(*source_)));

@@ -30,6 +30,10 @@ using MainExecutableFinder = std::function<std::optional<std::string>(const std:
 
 enum class CodeKind { executableImage, diskImage, opaqueFile, separatelySigned };
 
+/// The components of a signature in separate files, by the directory that they stand in; nothing when there
+/// is no code directory. Throws CodeError.
+std::optional<SignatureComponents> componentsOfSeparateFiles(const std::string& directory);
+
 /// The StaticCode of this service. Holds the file open, so that all answers are about one file even when its
 /// path gets another; keeps the signature once it was read.
 class FileCode final : public StaticCode {
@@ -40,8 +44,17 @@ class FileCode final : public StaticCode {
 
     CodeKind kind() const noexcept { return kind_; }
     bool inBundle() const noexcept { return !signatureDirectory_.empty(); }
+    const std::string& file() const noexcept { return file_; }
+    const std::string& signatureDirectory() const noexcept { return signatureDirectory_; }
     const ByteSource& source() const noexcept { return *source_; }
     const std::optional<DiskImageTrailer>& trailer() const noexcept { return trailer_; }
+
+    /// Where a disk image's trailer says the superblob stands; nothing when unsigned, or no disk image.
+    /// Throws CodeError when it reaches into the trailer.
+    std::optional<FileRange> diskImageSignature() const;
+
+    /// What the file itself adds to the components that a superblob carries.
+    SignatureComponents completed(SignatureComponents components) const;
 
     /// The signature; nothing when the code is not signed. Throws CodeError or foundation::ShortRead.
     const std::optional<CodeSignature>& signature();
@@ -54,15 +67,14 @@ class FileCode final : public StaticCode {
     void setDetachedSignature(ByteView superblob);
 
   private:
-    FileCode(CodeKind kind, std::unique_ptr<ByteSource> source, std::optional<DiskImageTrailer> trailer,
-             std::string signatureDirectory);
+    FileCode(CodeKind kind, std::string file, std::unique_ptr<ByteSource> source,
+             std::optional<DiskImageTrailer> trailer, std::string signatureDirectory);
 
     std::optional<CodeSignature> readSignature() const;
-
-    /// What the file itself adds to the components that a superblob carries.
     std::optional<CodeSignature> signatureFrom(ByteView superblob) const;
 
     CodeKind kind_;
+    std::string file_;  // a bundle's main executable, or the file itself
     std::unique_ptr<ByteSource> source_;
     std::optional<DiskImageTrailer> trailer_;
     std::string signatureDirectory_;  // of a bundle; empty for a plain file

@@ -69,6 +69,32 @@ std::vector<Blob> parseSuperBlob(ByteView superblob) {
     return blobs;
 }
 
+std::vector<SurveyedBlob> surveySuperBlob(ByteView superblob, std::size_t maximum, std::uint32_t& count) {
+    std::vector<SurveyedBlob> blobs;
+    count = 0;
+    const ByteReader whole(superblob);
+    ByteReader index = whole;
+    try {
+        index.skip(8, "superblob magic and length");
+        count = index.be32("superblob count");
+        for (std::uint32_t i = 0; i < count && i < maximum; ++i) {
+            SurveyedBlob& blob = blobs.emplace_back();
+            blob.slot = index.be32("index slot");
+            blob.offset = index.be32("index offset");
+            if (blob.offset >= superblob.size()) continue;
+            blob.bytes = superblob.subspan(blob.offset);
+            if (blob.bytes.size() < kBlobHeaderSize) continue;
+            ByteReader header(blob.bytes);
+            blob.magic = header.be32("blob magic");
+            blob.length = header.be32("blob length");
+            blob.bytes = blob.bytes.first(std::min<std::size_t>(*blob.length, blob.bytes.size()));
+        }
+    } catch (const foundation::ShortRead&) {
+        if (!blobs.empty()) blobs.pop_back();  // the entry itself is cut off
+    }
+    return blobs;
+}
+
 Data buildSuperBlob(const std::vector<std::pair<std::uint32_t, Data>>& blobs) {
     const std::size_t first = kSuperBlobHeaderSize + 8 * blobs.size();
     foundation::ByteWriter index;

@@ -17,6 +17,7 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 #include <utility>
 #include <vector>
 
@@ -52,6 +53,20 @@ struct Blob {
 /// The blobs, in index order, as views of `superblob`, which may be followed by padding. Throws CodeError or
 /// foundation::ShortRead.
 std::vector<Blob> parseSuperBlob(ByteView superblob);
+
+/// An entry of an index, and what of its blob lies within the superblob.
+struct SurveyedBlob {
+    std::uint32_t slot = 0;
+    std::uint32_t offset = 0;             // as stated
+    std::optional<std::uint32_t> magic;   // nothing when no blob header stands at the offset
+    std::optional<std::uint32_t> length;  // as stated
+    ByteView bytes;                       // from the offset, as long as stated or as there are
+};
+
+/// What an index lists, whatever is wrong with it or with the blobs: for showing a superblob that
+/// parseSuperBlob refuses. The first `maximum` entries; `count` becomes what the header states, 0 when there
+/// is none.
+std::vector<SurveyedBlob> surveySuperBlob(ByteView superblob, std::size_t maximum, std::uint32_t& count);
 
 /// The superblob that stands in `source` at `offset`, in an area of `areaLength` bytes, without its padding.
 /// Only the superblob itself is read. Throws CodeError.
