@@ -22,6 +22,10 @@ inline constexpr std::uint8_t kOperationNone = 0;
 inline constexpr std::uint8_t kOperationStaple = 1;
 inline constexpr std::uint8_t kOperationValidate = 2;
 
+/// The name of the record that holds the ticket for a code hash: "2/ALGORITHM/HEX", or "1/HEX" when the
+/// algorithm is 0.
+std::string recordNameForHash(std::uint32_t algorithm, foundation::ByteView hash);
+
 class DownloadDelegate : public https::SessionDelegate {
   public:
     DownloadDelegate(std::shared_ptr<PWHashedFile> hashedFile, const Platform& platform);

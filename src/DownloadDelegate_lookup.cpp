@@ -61,11 +61,15 @@ std::optional<URL> DownloadDelegate::lookupURL(std::optional<Error>& error) cons
                             defaults->boolForKey(kProductionKey) ? kProduction : kDevelopment);
 }
 
-std::string DownloadDelegate::recordName() {
-    const std::string hex = foundation::toHex(hashedFile_->cdHash().value_or(Data{}));
-    const std::uint32_t algorithm = hashedFile_->digestAlgorithm();
+std::string recordNameForHash(std::uint32_t algorithm, foundation::ByteView hash) {
+    const std::string hex = foundation::toHex(hash);
     if (algorithm == 0) return foundation::format("%d/%@", kRecordNameVersionPlain, hex);
     return foundation::format("%d/%d/%@", kRecordNameVersionWithAlgorithm, algorithm, hex);
+}
+
+std::string DownloadDelegate::recordName() {
+    const Data hash = hashedFile_->cdHash().value_or(Data{});
+    return recordNameForHash(hashedFile_->digestAlgorithm(), hash);
 }
 
 bool DownloadDelegate::grabTicket() {

@@ -5,6 +5,7 @@
 #include <limits>
 #include <new>
 #include <optional>
+#include <span>
 #include <utility>
 
 #include "foundation/byte_reader.h"
@@ -33,6 +34,52 @@ constexpr std::int32_t kRefused = -1;
 // A caller's mistake rather than a file's fault: no buffer can lie there.
 bool wrapsAddressSpace(const std::byte* start, std::uint64_t length) {
     return length > std::numeric_limits<std::uintptr_t>::max() - std::bit_cast<std::uintptr_t>(start);
+}
+
+std::optional<ticket_fault> findFault(ByteView container, const satchel_survey::fields& header, bool magic) {
+    if (!magic) return ticket_fault{0, "the container does not begin with its magic, \"s8ch\""};
+    if (header.version != kSatchelVersion) return ticket_fault{4, "the container's version is not 1"};
+    if (header.payload_length == 0) return ticket_fault{12, "the payload's length is 0"};
+    // Two 32-bit numbers and a small one: the sum fits 64 bits.
+    const std::uint64_t stated = kSatchelHeaderSize + std::uint64_t{header.certificates_length} +
+                                 header.payload_length + kSatchelSignatureSize;
+    if (stated != container.size())
+        return ticket_fault{8, "the lengths of the parts do not add up to the container's"};
+    return std::nullopt;
+}
+
+// Where the certificate block ends when the lengths do not add up: they say so in two ways, and the block
+// itself in a third.
+std::uint64_t certificatesLengthIn(ByteView parts, const satchel_survey::fields& header) {
+    const std::optional<der::Element> block = der::readElement(parts);
+    const std::uint64_t stated = header.certificates_length;
+    const std::uint64_t own = block ? block->whole.size() : stated;
+    const bool payloadFits = header.payload_length <= parts.size();
+    const std::uint64_t fromPayload = payloadFits ? parts.size() - header.payload_length : stated;
+    const std::uint64_t chosen = own == fromPayload ? fromPayload : (own == stated || !block ? stated : own);
+    return std::min<std::uint64_t>(chosen, parts.size());
+}
+
+void locateParts(ByteView container, satchel_survey& survey) {
+    if (container.size() < kSatchelHeaderSize + kSatchelSignatureSize) return;
+    const ByteView signedData = container.first(container.size() - kSatchelSignatureSize);
+    const ByteView parts = signedData.subspan(kSatchelHeaderSize);
+    const bool addsUp =
+        survey.header->certificates_length + std::uint64_t{survey.header->payload_length} == parts.size();
+    const std::uint64_t certificatesLength =
+        addsUp ? survey.header->certificates_length : certificatesLengthIn(parts, *survey.header);
+
+    const ByteView certificates = parts.first(certificatesLength);
+    const ByteView payload = parts.subspan(certificatesLength);
+    survey.view = {.certificates = certificates.data(),
+                   .certificates_length = certificates.size(),
+                   .payload = payload.data(),
+                   .payload_length = payload.size(),
+                   .signature = signedData.data() + signedData.size(),
+                   .signature_length = kSatchelSignatureSize,
+                   .signed_data = signedData.data(),
+                   .signed_data_length = signedData.size(),
+                   .version = survey.header->version};
 }
 
 // An object that cannot be made is a refusal like any other here.
@@ -102,39 +149,33 @@ trust::Status verify(const satchel_view& view, trust::TrustService& service) {
 
 }  // namespace
 
+satchel_survey satchel_survey_container(ByteView container) {
+    satchel_survey survey;
+    if (container.size() < kSatchelHeaderSize) {
+        survey.fault = {container.size(), "the container ends inside its header"};
+        return survey;
+    }
+    ByteReader reader(container);
+    const bool known =
+        std::ranges::equal(reader.bytes(kSatchelMagic.size(), "satchel magic"), asBytes(kSatchelMagic));
+    survey.header.emplace();
+    survey.header->version = reader.le16("satchel version");
+    survey.header->reserved = reader.le16("reserved");
+    survey.header->certificates_length = reader.le32("certificate block length");
+    survey.header->payload_length = reader.le32("payload length");
+
+    survey.fault = findFault(container, *survey.header, known);
+    locateParts(container, survey);
+    return survey;
+}
+
 std::int32_t satchel_decode_header(const std::byte* container, std::uint64_t length, satchel_view* view) {
     if (view == nullptr) return kRefused;
     *view = {};
-    if (container == nullptr || length < kSatchelHeaderSize || wrapsAddressSpace(container, length)) {
-        return kRefused;
-    }
-
-    ByteReader reader(ByteView(container, length));
-    if (!std::ranges::equal(reader.bytes(kSatchelMagic.size(), "satchel magic"), asBytes(kSatchelMagic))) {
-        return kRefused;
-    }
-    const std::uint16_t version = reader.le16("satchel version");
-    if (version != kSatchelVersion) return kRefused;
-    reader.skip(2, "reserved");
-    const std::uint64_t certificatesLength = reader.le32("certificate block length");
-    const std::uint64_t payloadLength = reader.le32("payload length");
-    if (payloadLength == 0) return kRefused;
-    // Two 32-bit numbers and a small one: the sum fits 64 bits.
-    const std::uint64_t signedLength = kSatchelHeaderSize + certificatesLength + payloadLength;
-    if (signedLength + kSatchelSignatureSize != length) return kRefused;
-
-    const ByteView certificates = reader.bytes(certificatesLength, "certificate block");
-    const ByteView payload = reader.bytes(payloadLength, "payload");
-    const ByteView signature = reader.bytes(kSatchelSignatureSize, "signature");
-    *view = {.certificates = certificates.data(),
-             .certificates_length = certificates.size(),
-             .payload = payload.data(),
-             .payload_length = payload.size(),
-             .signature = signature.data(),
-             .signature_length = signature.size(),
-             .signed_data = container,
-             .signed_data_length = signedLength,
-             .version = version};
+    if (container == nullptr || wrapsAddressSpace(container, length)) return kRefused;
+    const satchel_survey survey = satchel_survey_container(ByteView(container, length));
+    if (survey.fault) return kRefused;
+    *view = survey.view;
     return kAccepted;
 }
 
@@ -162,30 +203,55 @@ trust::Status _satchel_verify(const satchel_view* view, trust::TrustService& ser
     return guardMemory([&] { return verify(*view, service); });
 }
 
+satchel_certificate_block satchel_survey_certificates(ByteView block) {
+    satchel_certificate_block survey;
+    const std::optional<der::Element> sequence = der::readElement(block);
+    if (!sequence) {
+        survey.refuse(status::kNotAvailable, 0, "the certificate block is no DER element");
+        return survey;
+    }
+    if (sequence->tag != der::kConstructedSequence || sequence->whole.size() != block.size()) {
+        survey.refuse(status::kBadParameter, 0, "the certificate block is not one SEQUENCE that fills it");
+        return survey;
+    }
+
+    ByteView rest = sequence->contents;
+    const auto position = [&] { return block.size() - rest.size(); };
+    while (!rest.empty() && survey.count < kSatchelMaximumCertificates) {
+        const std::optional<der::Element> element = der::readElement(rest);
+        if (!element) {
+            survey.refuse(status::kNotAvailable, position(), "a certificate is no DER element");
+            return survey;
+        }
+        if (element->whole.size() > kSatchelMaximumCertificateSize) {
+            survey.refuse(status::kBadCertificates, position(), "a certificate is too long");
+            return survey;
+        }
+        survey.elements[survey.count++] = element->whole;
+        rest = rest.subspan(element->whole.size());
+    }
+    if (!rest.empty()) {
+        survey.refuse(status::kBadCertificates, position(), "there are more than three certificates");
+    } else if (survey.count == 0) {
+        survey.refuse(status::kBadCertificates, position(), "there is no certificate");
+    }
+    return survey;
+}
+
 trust::Status _satchel_copy_certificates(ByteView block, std::vector<trust::CertificateRef>* certificates,
                                          trust::TrustService& service) {
     if (certificates == nullptr) return status::kBadParameter;
     certificates->clear();
 
-    const std::optional<der::Element> sequence = der::readElement(block);
-    if (!sequence) return status::kNotAvailable;
-    if (sequence->tag != der::kConstructedSequence || sequence->whole.size() != block.size()) {
-        return status::kBadParameter;
-    }
-
+    const satchel_certificate_block survey = satchel_survey_certificates(block);
     std::vector<trust::CertificateRef> found;
     found.reserve(kSatchelMaximumCertificates);
-    ByteView rest = sequence->contents;
-    while (!rest.empty() && found.size() < kSatchelMaximumCertificates) {
-        const std::optional<der::Element> element = der::readElement(rest);
-        if (!element) return status::kNotAvailable;
-        if (element->whole.size() > kSatchelMaximumCertificateSize) return status::kBadCertificates;
-        trust::CertificateRef certificate = service.createCertificate(element->whole);
+    for (const ByteView element : std::span(survey.elements).first(survey.count)) {
+        trust::CertificateRef certificate = service.createCertificate(element);
         if (certificate == nullptr) return status::kBadCertificates;
         found.push_back(std::move(certificate));
-        rest = rest.subspan(element->whole.size());
     }
-    if (!rest.empty() || found.empty()) return status::kBadCertificates;
+    if (survey.status != status::kSuccess) return survey.status;
 
     *certificates = std::move(found);
     return status::kSuccess;

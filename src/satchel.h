@@ -32,8 +32,11 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 #include <string_view>
 
+#include "foundation/bytes.h"
+#include "src/ticket_fault.h"
 #include "trust/trust.h"
 
 namespace pinwell {
@@ -60,6 +63,26 @@ struct satchel_view {
 
     bool operator==(const satchel_view&) const = default;
 };
+
+/// What a container says of itself, whether or not it keeps to the rules: for showing a damaged one. The
+/// fields are as stored; there are none when it is shorter than its header.
+struct satchel_survey {
+    struct fields {
+        std::uint16_t version = 0;
+        std::uint16_t reserved = 0;
+        std::uint32_t certificates_length = 0;
+        std::uint32_t payload_length = 0;
+    };
+    std::optional<fields> header;
+
+    /// Where the parts are, as good as that can be told. When the lengths do not add up, the one that does
+    /// not fit the certificate block's own is taken to be wrong. A part that is not there is null.
+    satchel_view view;
+
+    /// Nothing when satchel_decode_header accepts the container.
+    std::optional<ticket_fault> fault;
+};
+satchel_survey satchel_survey_container(foundation::ByteView container);
 
 /// Reads the framing alone: the certificate block, the payload and the signature are located, not looked at.
 std::int32_t satchel_decode_header(const std::byte* container, std::uint64_t length, satchel_view* view);

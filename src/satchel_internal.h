@@ -1,9 +1,12 @@
 // The steps inside satchel_verify_signature, with the statuses that tell its refusals apart.
 //
-// For satchel.cpp and its tests alone. The statuses end at satchel_verify_signature, which makes -1 of each.
+// For satchel.cpp, its tests, and the companion that explains a refusal. The statuses end at
+// satchel_verify_signature, which makes -1 of each.
 #pragma once
 
+#include <array>
 #include <memory>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -53,6 +56,20 @@ inline constexpr std::int64_t kTicketMinimumEllipticCurveBits = 256;
 
 /// All of satchel_verify_signature, status and all.
 trust::Status _satchel_verify(const satchel_view* view, trust::TrustService& service);
+
+/// The elements of the certificate block, as views of it, up to the first that breaks a rule.
+struct satchel_certificate_block {
+    std::array<foundation::ByteView, kSatchelMaximumCertificates> elements;
+    std::size_t count = 0;
+    trust::Status status = satchel_status::kSuccess;
+    std::optional<ticket_fault> fault;  // when the status is not success
+
+    void refuse(trust::Status why, std::uint64_t offset, const char* rule) {
+        status = why;
+        fault = ticket_fault{offset, rule};
+    }
+};
+satchel_certificate_block satchel_survey_certificates(foundation::ByteView block);
 
 /// The certificates of the block, signer first; empty unless it succeeds.
 trust::Status _satchel_copy_certificates(foundation::ByteView block,

@@ -97,6 +97,53 @@ Header blockHeader(const tm_ticket* ticket) {
     return readBlockHeader(reader);
 }
 
+std::optional<ticket_fault> findFault(ByteView payload, const Header& header, bool magic) {
+    if (payload.size() > kTicketMaximumSize) return ticket_fault{0, "the payload is longer than 16 MiB"};
+    if (!magic) return ticket_fault{0, "the payload does not begin with its magic, \"m8tk\""};
+    if (header.version != kVersionWithoutAlgorithms && header.version != kVersionWithAlgorithms)
+        return ticket_fault{4, "the payload's version is neither 1 nor 2"};
+    if (std::ranges::find(kHashSizes, header.hashLength) == kHashSizes.end())
+        return ticket_fault{6, "the hash length is neither 20 nor 48"};
+    if (header.size() != payload.size())
+        return ticket_fault{8, "the number of entries does not fit the payload's length"};
+    return std::nullopt;
+}
+
+// The version and hash length that agree with most of what is stored; the stored ones when all does.
+Header likeliestLayout(const Header& stored, std::uint64_t entriesSize) {
+    Header best = stored;
+    int most = -1;
+    for (const std::uint16_t version : {kVersionWithAlgorithms, kVersionWithoutAlgorithms}) {
+        for (const std::uint16_t hashLength : {kHashSizes.front(), kHashSizes.back()}) {
+            Header layout = stored;
+            layout.version = version;
+            layout.hashLength = hashLength;
+            const bool fits = layout.count * layout.entrySize() == entriesSize;
+            const int agreed = (version == stored.version ? 1 : 0) +
+                               (hashLength == stored.hashLength ? 1 : 0) + (fits ? 1 : 0);
+            if (agreed <= most) continue;
+            best = layout;
+            most = agreed;
+        }
+    }
+    return best;
+}
+
+std::int32_t copyEntry(ByteReader entry, std::uint16_t version, std::uint16_t hashLength, tm_cdhash* cdhash) {
+    tm_cdhash record;
+    record.algorithm = kUnnamedAlgorithm;
+    if (version == kVersionWithAlgorithms) {
+        record.algorithm = entry.u8("algorithm");
+        if (record.algorithm == kUnnamedAlgorithm) return kRefused;
+    }
+    const std::size_t length = tm_cdhash_algorithm_get_size(record.algorithm);
+    if (length == 0 || length > hashLength) return kRefused;
+    std::ranges::copy(entry.bytes(length, "hash"), record.hash.begin());
+    record.length = static_cast<std::uint16_t>(length);
+    *cdhash = record;
+    return kAccepted;
+}
+
 // A zeroed block that begins with the parts, one behind the other; null when memory runs out.
 tm_ticket_ptr makeBlock(std::uint64_t size, std::initializer_list<ByteView> parts) {
     tm_ticket_ptr ticket(new (std::nothrow) tm_ticket[static_cast<std::size_t>(size)]{});
@@ -124,23 +171,16 @@ std::int32_t tm_ticket_decode(const std::byte* payload, std::int64_t size, tm_ti
     if (payload == nullptr || ticket == nullptr) return kRefused;
 
     const ByteView bytes(payload, static_cast<std::size_t>(size));
-    ByteReader reader(bytes);
-    if (!std::ranges::equal(reader.bytes(kTicketMagic.size(), "ticket magic"), asBytes(kTicketMagic))) {
-        return kRefused;
-    }
-    const Header header = readPayloadHeader(reader);
-    if (header.version != kVersionWithoutAlgorithms && header.version != kVersionWithAlgorithms) {
-        return kRefused;
-    }
-    if (std::ranges::find(kHashSizes, header.hashLength) == kHashSizes.end()) return kRefused;
-    if (header.size() != bytes.size()) return kRefused;
+    const tm_ticket_survey survey = tm_ticket_survey_payload(bytes);
+    if (survey.fault) return kRefused;
 
+    ByteReader reader(bytes);
     reader.seek(4, "version, hash length and count");
     const ByteView versionToCount = reader.bytes(8, "version, hash length and count");
     const ByteView flags = reader.bytes(4, "ticket flags");
     const ByteView signatureTime = reader.bytes(8, "ticket signature time");
     const ByteView entries = reader.bytes(reader.remaining(), "ticket entries");
-    tm_ticket_ptr made = makeBlock(header.size(), {versionToCount, signatureTime, flags, entries});
+    tm_ticket_ptr made = makeBlock(bytes.size(), {versionToCount, signatureTime, flags, entries});
     if (made == nullptr) return kRefused;
     *ticket = made.release();
     return kAccepted;
@@ -175,18 +215,40 @@ std::int32_t tm_ticket_copy_cdhash(const tm_ticket* ticket, std::uint64_t index,
 
     ByteReader entry = ByteReader(blockBytes(ticket, header.size()))
                            .sub(kBlockHeaderSize + index * header.entrySize(), header.entrySize(), "entry");
-    tm_cdhash record;
-    record.algorithm = kUnnamedAlgorithm;
-    if (header.version == kVersionWithAlgorithms) {
-        record.algorithm = entry.u8("algorithm");
-        if (record.algorithm == kUnnamedAlgorithm) return kRefused;
+    return copyEntry(entry, header.version, header.hashLength, cdhash);
+}
+
+std::uint64_t tm_ticket_survey::entry_size() const {
+    return Header{.version = version, .hashLength = hash_length}.entrySize();
+}
+
+tm_ticket_survey tm_ticket_survey_payload(ByteView payload) {
+    tm_ticket_survey survey;
+    if (payload.size() < kTicketHeaderSize) {
+        survey.fault = {payload.size(), "the payload ends inside its header"};
+        return survey;
     }
-    const std::size_t length = tm_cdhash_algorithm_get_size(record.algorithm);
-    if (length == 0 || length > header.hashLength) return kRefused;
-    std::ranges::copy(entry.bytes(length, "hash"), record.hash.begin());
-    record.length = static_cast<std::uint16_t>(length);
-    *cdhash = record;
-    return kAccepted;
+    ByteReader reader(payload);
+    const bool magic =
+        std::ranges::equal(reader.bytes(kTicketMagic.size(), "ticket magic"), asBytes(kTicketMagic));
+    const Header stored = readPayloadHeader(reader);
+    survey.header = {stored.version, stored.hashLength, stored.count, stored.flags, stored.signatureTime};
+    survey.fault = findFault(payload, stored, magic);
+    survey.entries = reader.bytes(reader.remaining(), "ticket entries");
+
+    const Header layout = likeliestLayout(stored, survey.entries.size());
+    survey.version = layout.version;
+    survey.hash_length = layout.hashLength;
+    survey.count = survey.entries.size() / layout.entrySize();
+    return survey;
+}
+
+std::int32_t tm_ticket_survey_copy_cdhash(const tm_ticket_survey& survey, std::uint64_t index,
+                                          tm_cdhash* cdhash) {
+    if (cdhash == nullptr || index >= survey.count) return kRefused;
+    const std::uint64_t size = survey.entry_size();
+    return copyEntry(ByteReader(survey.entries).sub(index * size, size, "entry"), survey.version,
+                     survey.hash_length, cdhash);
 }
 
 std::size_t tm_cdhash_algorithm_get_size(std::uint32_t algorithm) {

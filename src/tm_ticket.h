@@ -28,8 +28,11 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <string_view>
 
+#include "foundation/bytes.h"
+#include "src/ticket_fault.h"
 #include "trust/trust.h"
 
 namespace pinwell {
@@ -58,6 +61,36 @@ std::int32_t satchel_get_validated_tm_ticket(const std::byte* container, std::ui
 
 /// Decodes a payload that has been verified. `ticket` is written only on success.
 std::int32_t tm_ticket_decode(const std::byte* payload, std::int64_t size, tm_ticket** ticket);
+
+/// What a payload says, whether or not it keeps to the rules: for showing a damaged one. The fields are as
+/// stored; there are none when it is shorter than its header.
+struct tm_ticket_survey {
+    struct fields {
+        std::uint16_t version = 0;
+        std::uint16_t hash_length = 0;
+        std::uint32_t count = 0;
+        std::uint32_t flags = 0;
+        std::uint64_t signature_time = 0;
+    };
+    std::optional<fields> header;
+
+    /// How the entries are read: as the header says or, when version, hash length and count do not go
+    /// together with the payload's size, as most of them do.
+    std::uint16_t version = 0;
+    std::uint16_t hash_length = 0;
+    std::uint64_t count = 0;
+    foundation::ByteView entries;  // part of the payload
+
+    /// Nothing when tm_ticket_decode accepts the payload.
+    std::optional<ticket_fault> fault;
+
+    std::uint64_t entry_size() const;
+};
+tm_ticket_survey tm_ticket_survey_payload(foundation::ByteView payload);
+
+/// The entry at `index` of what was surveyed, by the rules of tm_ticket_copy_cdhash.
+std::int32_t tm_ticket_survey_copy_cdhash(const tm_ticket_survey& survey, std::uint64_t index,
+                                          tm_cdhash* cdhash);
 
 /// A ticket of the same bytes; null when memory runs out.
 tm_ticket* tm_ticket_copy(const tm_ticket* ticket);

@@ -37,6 +37,11 @@ PWHashedDiskImage::PWHashedDiskImage(const URL& fileURL, const Platform& platfor
     if (!populateHeader()) setAppropriateExitCode(kExitNoInput);
 }
 
+bool PWHashedDiskImage::refuse(std::uint64_t offset, const char* rule) {
+    fault_ = {offset, rule};
+    return false;
+}
+
 bool PWHashedDiskImage::populateHeader() {
     noteState();
     const auto opened = platform().files.openForReading(*fileURL());
@@ -44,7 +49,7 @@ bool PWHashedDiskImage::populateHeader() {
         NoisyLog("Could not create file handle to %@. %@", *fileURL(), opened.error());
         NoisyLog("Could not get disk image header from %@. %@", fileURL()->lastPathComponent(),
                  opened.error());
-        return false;
+        return refuse(0, "the file cannot be opened");
     }
     files::FileHandle& file = **opened;
     if (!readTrailer(file)) return false;
@@ -62,11 +67,12 @@ bool PWHashedDiskImage::readTrailer(files::FileHandle& file) {
             });
     if (origEOF_ < kUDIFHeaderSize) {
         NoisyLog("%@ is too small (%llu bytes) to be a proper disk image", name, origEOF_);
-        return false;
+        return refuse(0, "the file is too small for a disk image's trailer");
     }
+    const std::uint64_t trailerStart = origEOF_ - kUDIFHeaderSize;
     attempt(
         [&] {
-            file.seek(origEOF_ - kUDIFHeaderSize);
+            file.seek(trailerStart);
             dmgHeader_.assign(file.read(kUDIFHeaderSize));
         },
         [&](const char* reason) {
@@ -74,12 +80,12 @@ bool PWHashedDiskImage::readTrailer(files::FileHandle& file) {
         });
     if (!dmgHeader_.hasMagic()) {
         NoisyLog("Not a supported disk image format, %d", dmgHeader_.magicAsShown());
-        return false;
+        return refuse(trailerStart, "the file does not end in a disk image's trailer");
     }
     if (dmgHeader_.version() != kUDIFVersion) {
         NoisyLog("%@ only supports version %d disk images while %@ is version %d.", foundation::processName(),
                  kUDIFVersion, name, dmgHeader_.version());
-        return false;
+        return refuse(trailerStart + 4, "the trailer's version is not 4");
     }
     csStart_ = dmgHeader_.codeSignOffset();
     csLength_ = dmgHeader_.codeSignLength();
@@ -89,18 +95,20 @@ bool PWHashedDiskImage::readTrailer(files::FileHandle& file) {
 bool PWHashedDiskImage::readSignature(files::FileHandle& file) {
     endOfDMGData_ = csStart_;
     NoisyLog("Codesign offset 0x%llx length: %llu", csStart_, csLength_);
-    if (csLength_ > std::numeric_limits<std::uint64_t>::max() - csStart_) return false;
-    const std::uint64_t end = csStart_ + csLength_;
     const std::uint64_t trailerStart = origEOF_ - kUDIFHeaderSize;
+    const std::uint64_t fields = trailerStart + kUDIFCodeSignFieldsOffset;
+    if (csLength_ > std::numeric_limits<std::uint64_t>::max() - csStart_)
+        return refuse(fields, "the signature's offset and length are out of range");
+    const std::uint64_t end = csStart_ + csLength_;
     if (end != trailerStart) {
         NoisyLog(
             "In a good disk image, the stored code signature end MUST match the UDIF header start. It "
             "currently "
             "doesn't. (%llu vs %llu)",
             end, trailerStart);
-        return false;
+        return refuse(fields, "the signature does not end where the trailer begins");
     }
-    if (csLength_ > codesign::kMaximumSuperBlobLength) return false;
+    if (csLength_ > codesign::kMaximumSuperBlobLength) return refuse(fields, "the signature is too long");
     attempt(
         [&] {
             file.seek(csStart_);
@@ -110,7 +118,7 @@ bool PWHashedDiskImage::readSignature(files::FileHandle& file) {
             NoisyLog("Could read code signature header of %@. This should not have happened. %@",
                      fileURL()->lastPathComponent(), reason);
         });
-    return superblob_.size() == csLength_;
+    return superblob_.size() == csLength_ || refuse(csStart_, "the signature cannot be read");
 }
 
 bool PWHashedDiskImage::makeUpForMissingSignature() {
@@ -121,7 +129,7 @@ bool PWHashedDiskImage::makeUpForMissingSignature() {
     const auto status = syntheticCDHashForURL(*fileURL(), platform(), &algorithm, &cdHash);
     if (status != codesign::kSuccess) {
         NoisyLog("synthetic cdHash generation failed. %d", status);
-        return false;
+        return refuse(0, "no hash can be made up for the unsigned image");
     }
     csStart_ = endOfDMGData_ = origEOF_ - kUDIFHeaderSize;
     superblob_ = emptySuperblob();
@@ -138,7 +146,7 @@ bool PWHashedDiskImage::readBlobs() {
     ByteReader reader(header);
     if (reader.be32("superblob magic") != kSuperblobMagic) {
         NoisyLog("Not a supported code signature block, %d", ByteReader(header).le32("superblob magic"));
-        return false;
+        return refuse(csStart_, "the superblob does not begin with its magic");
     }
     const std::uint32_t length = reader.be32("superblob length");
     numBlobs_ = reader.be32("superblob count");
@@ -148,15 +156,16 @@ bool PWHashedDiskImage::readBlobs() {
     if (mostBlobs < numBlobs_) {
         NoisyLog("%tu blobs in %@ exceeds the maximum possible number of blobs, %d", mostBlobs,
                  fileURL()->lastPathComponent(), numBlobs_);
-        return false;
+        return refuse(csStart_ + 8, "the superblob counts more blobs than it has room for");
     }
     if (csLength_ != length) {
         NoisyLog("The code signature block must be %llu bytes in length. However, it is %d.", csLength_,
                  length);
-        return false;
+        return refuse(csStart_ + 4, "the superblob's length is not the one in the trailer");
     }
     blobs_ = orderedBlobSetForSuperBlob(superblob_, numBlobs_).value_or(BlobSet{});
-    return blobs_.size() == numBlobs_;
+    return blobs_.size() == numBlobs_ ||
+           refuse(csStart_ + kSuperblobHeaderSize, "the blobs do not fill the superblob back to back");
 }
 
 std::optional<Data> PWHashedDiskImage::_ticketData() {

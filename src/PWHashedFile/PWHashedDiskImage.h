@@ -14,6 +14,7 @@
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/PWHashedFile/blob_set.h"
 #include "src/PWHashedFile/udif_header.h"
+#include "src/ticket_fault.h"
 
 namespace pinwell {
 
@@ -38,6 +39,9 @@ class PWHashedDiskImage : public PWHashedFile {
 
     std::uint32_t numBlobs() const noexcept { return numBlobs_; }
 
+    /// Why trailer and superblob are not those of a disk image, and where in the file; nothing when they are.
+    const std::optional<ticket_fault>& fault() const noexcept { return fault_; }
+
     std::optional<Data> _ticketData() override;
     std::optional<Data> _cdHash() override;
 
@@ -55,6 +59,7 @@ class PWHashedDiskImage : public PWHashedFile {
     bool readSignature(files::FileHandle& file);
     bool makeUpForMissingSignature();
     bool readBlobs();
+    bool refuse(std::uint64_t offset, const char* rule);
 
     void saveDebugCopy(foundation::ByteView signatureAndTrailer, std::optional<Error>& held) const;
     void writeAtEndOfData(files::FileHandle& file, foundation::ByteView signatureAndTrailer,
@@ -70,6 +75,7 @@ class PWHashedDiskImage : public PWHashedFile {
     std::uint64_t csLength_ = 0;
     std::uint64_t endOfDMGData_ = 0;
     std::uint32_t numBlobs_ = 0;
+    std::optional<ticket_fault> fault_;
 };
 
 }  // namespace pinwell

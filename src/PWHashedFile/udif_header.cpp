@@ -12,7 +12,6 @@ using foundation::ByteReader;
 namespace {
 
 constexpr std::size_t kVersionOffset = 4;
-constexpr std::size_t kCodeSignOffsetOffset = 296;
 constexpr std::size_t kCodeSignLengthOffset = 304;
 
 ByteReader readerAt(foundation::ByteView header, std::size_t offset) {
@@ -42,7 +41,7 @@ std::uint32_t UDIFFileHeader::version() const {
 }
 
 std::uint64_t UDIFFileHeader::codeSignOffset() const {
-    return readerAt(bytes_, kCodeSignOffsetOffset).be64("fUDIFCodeSignOffset");
+    return readerAt(bytes_, kUDIFCodeSignFieldsOffset).be64("fUDIFCodeSignOffset");
 }
 
 std::uint64_t UDIFFileHeader::codeSignLength() const {
@@ -50,9 +49,9 @@ std::uint64_t UDIFFileHeader::codeSignLength() const {
 }
 
 void UDIFFileHeader::setCodeSign(std::uint64_t offset, std::uint64_t length) {
-    static_assert(kCodeSignLengthOffset == kCodeSignOffsetOffset + sizeof offset);
+    static_assert(kCodeSignLengthOffset == kUDIFCodeSignFieldsOffset + sizeof offset);
     const auto fields = foundation::ByteWriter().be64(offset).be64(length).data();
-    std::copy(fields.begin(), fields.end(), bytes_.begin() + kCodeSignOffsetOffset);
+    std::copy(fields.begin(), fields.end(), bytes_.begin() + kUDIFCodeSignFieldsOffset);
 }
 
 }  // namespace pinwell

@@ -33,6 +33,8 @@
 namespace pinwell {
 
 inline constexpr std::size_t kUDIFHeaderSize = 512;
+/// Of fUDIFCodeSignOffset and, behind it, fUDIFCodeSignLength.
+inline constexpr std::size_t kUDIFCodeSignFieldsOffset = 296;
 inline constexpr std::uint32_t kUDIFMagic = 0x6B6F6C79;  // "koly"
 inline constexpr std::uint32_t kUDIFVersion = 4;
 
