@@ -1,0 +1,29 @@
+// Finding out everything about a path that bears on its ticket. Reads, and changes nothing; no network.
+#pragma once
+
+#include <string>
+
+#include "inspect/report.h"
+#include "src/platform.h"
+
+namespace pinwell::inspect {
+
+/// Reads the artefact, or the bare ticket, at `path` and judges its ticket with the services of `platform`.
+/// The tool's message functions must be silent.
+class Inspector {
+  public:
+    explicit Inspector(const Platform& platform) : platform_(platform) {}
+
+    /// Never throws for what is wrong with the path or its contents.
+    Report inspect(const std::string& path) const;
+
+  private:
+    void gatherBundle(const foundation::URL& url, Report& report) const;
+    void gatherImage(const foundation::URL& url, Report& report) const;
+    void gatherPackage(const foundation::URL& url, Report& report) const;
+    bool gatherBareTicket(const foundation::URL& url, bool mustLookLikeOne, Report& report) const;
+
+    Platform platform_;
+};
+
+}  // namespace pinwell::inspect

@@ -1,0 +1,242 @@
+#include "inspect/gather_ticket.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "foundation/format.h"
+#include "src/satchel.h"
+#include "src/satchel_internal.h"
+#include "src/tm_ticket.h"
+#include "trust/der.h"
+
+namespace pinwell::inspect {
+namespace {
+
+using foundation::ByteView;
+
+/// Places of a damaged certificate block at which a certificate is looked for.
+constexpr std::size_t kMaximumSearches = 4096;
+
+/// No certificate is shorter; what is, is not worth a search.
+constexpr std::size_t kShortestCertificate = 100;
+
+/// Makes faults with both offsets.
+class Offsets {
+  public:
+    explicit Offsets(std::optional<std::uint64_t> fileOffset) : fileOffset_(fileOffset) {}
+
+    Fault fault(std::string rule, std::uint64_t offset) const {
+        Fault made{std::move(rule), offset, std::nullopt};
+        if (fileOffset_) made.fileOffset = *fileOffset_ + offset;
+        return made;
+    }
+
+    /// A fault of a part that begins at `base`.
+    std::optional<Fault> fault(const std::optional<ticket_fault>& found, std::uint64_t base) const {
+        if (!found) return std::nullopt;
+        return fault(found->rule, base + found->offset);
+    }
+
+  private:
+    std::optional<std::uint64_t> fileOffset_;
+};
+
+std::optional<trust::CertificateDescription> certificateAt(ByteView rest, std::size_t& size,
+                                                           std::size_t& searches) {
+    const auto element = trust::der::readElement(rest);
+    const bool likely = element && element->tag == trust::der::kConstructedSequence &&
+                        element->whole.size() >= kShortestCertificate &&
+                        element->whole.size() <= kSatchelMaximumCertificateSize;
+    if (!likely || searches >= kMaximumSearches) return std::nullopt;
+    ++searches;
+    auto description = trust::describeCertificate(element->whole);
+    if (description) size = element->whole.size();
+    return description;
+}
+
+/// Every certificate in the block, wherever it stands: the framing around them may be what is damaged.
+void gatherCertificates(ByteView block, Ticket& into) {
+    const std::uint64_t base = into.certificateBlock->offset;
+    const auto sequence = trust::der::readElement(block);
+    const bool whole = sequence && sequence->whole.size() == block.size();
+    std::size_t at = whole ? block.size() - sequence->contents.size() : 0;
+    std::size_t unreadableFrom = at;
+    std::size_t searches = 0;
+    const auto closeGap = [&](std::size_t end) {
+        if (end > unreadableFrom) into.unreadable.push_back({base + unreadableFrom, end - unreadableFrom});
+    };
+    while (at < block.size() && into.certificates.size() < kMaximumCertificatesKept) {
+        std::size_t size = 0;
+        auto description = certificateAt(block.subspan(at), size, searches);
+        if (!description) {
+            ++at;
+            continue;
+        }
+        closeGap(at);
+        into.certificates.push_back({{base + at, size}, *std::move(description)});
+        at += size;
+        unreadableFrom = at;
+    }
+    closeGap(block.size());
+}
+
+std::optional<Fault> certificateFaultOf(ByteView block, const Ticket& ticket, const Offsets& offsets) {
+    const std::uint64_t base = ticket.certificateBlock->offset;
+    const satchel_certificate_block survey = satchel_survey_certificates(block);
+    for (std::size_t i = 0; i < survey.count; ++i) {
+        const auto start = base + static_cast<std::uint64_t>(survey.elements[i].data() - block.data());
+        const bool readable = std::any_of(ticket.certificates.begin(), ticket.certificates.end(),
+                                          [&](const Certificate& one) { return one.range.offset == start; });
+        if (!readable)
+            return offsets.fault(foundation::format("certificate %zu cannot be read", i + 1), start);
+    }
+    return offsets.fault(survey.fault, base);
+}
+
+void judgeChain(ByteView bytes, const satchel_view& view, trust::TrustService& service, Ticket& into) {
+    std::vector<trust::CertificateRef> list;
+    for (const Certificate& one : into.certificates)
+        if (auto certificate = service.createCertificate(bytes.subspan(one.range.offset, one.range.length)))
+            list.push_back(std::move(certificate));
+    if (list.empty()) {
+        into.chain.reason = "there is no certificate that can be read";
+        return;
+    }
+
+    trust::PolicyRef policy;
+    if (_satchel_create_cert_policy(&policy, service) != satchel_status::kSuccess) {
+        into.chain.reason = "the platform security library has no policy for tickets";
+        return;
+    }
+    std::shared_ptr<trust::Trust> object;
+    trust::Verdict verdict = trust::Verdict::invalid;
+    if (service.createTrust(list, policy, object) != trust::kSuccess || object == nullptr ||
+        object->evaluate(verdict) != trust::kSuccess) {
+        into.chain.reason = "the chain could not be judged";
+        return;
+    }
+    into.chain.trusted = verdict == trust::Verdict::unspecified;
+    if (verdict == trust::Verdict::proceed)
+        into.chain.reason = "only the user's own settings trust the chain, which is not enough for a ticket";
+    else if (!into.chain.trusted)
+        into.chain.reason = object->copyFailureDescription().value_or("the chain is not trusted");
+    for (const foundation::Value& one : object->copyProperties()) {
+        const std::string* const title = one[trust::kPropertyTitle].string();
+        const std::string* const error = one[trust::kPropertyError].string();
+        into.chain.links.push_back({title == nullptr ? "" : *title, error == nullptr ? "" : *error});
+    }
+
+    // Without the signer's own certificate the list begins with another, whose key says nothing.
+    const bool signerIsReadable =
+        into.unreadable.empty() || into.certificates.front().range.offset < into.unreadable.front().offset;
+    const trust::PublicKeyRef key = object->copyPublicKey();
+    if (key == nullptr || !signerIsReadable) return;
+    const auto status = _satchel_validate_signature(*key, ByteView(view.signed_data, view.signed_data_length),
+                                                    ByteView(view.signature, view.signature_length), service);
+    into.signature = status == satchel_status::kSuccess ? Signature::verifies : Signature::fails;
+}
+
+Entry entryAt(const tm_ticket_survey& survey, std::uint64_t index, const std::optional<Hash>& artefact) {
+    Entry entry;
+    entry.index = index;
+    tm_cdhash record;
+    if (tm_ticket_survey_copy_cdhash(survey, index, &record) != 0) return entry;
+    entry.isUsable = true;
+    entry.hash = {record.algorithm, foundation::toData(ByteView(record.hash).first(record.length))};
+    entry.matches = artefact && artefact->bytes == entry.hash.bytes;
+    return entry;
+}
+
+Payload gatherPayload(const tm_ticket_survey& survey, Range range, const std::optional<Hash>& artefact) {
+    Payload payload;
+    payload.range = range;
+    if (!survey.header) return payload;
+    payload.hasHeader = true;
+    payload.version = survey.header->version;
+    payload.hashLength = survey.header->hash_length;
+    payload.statedCount = survey.header->count;
+    payload.flags = survey.header->flags;
+    payload.signatureTime = survey.header->signature_time;
+    payload.isRevoked = (payload.flags & kTicketRevoked) != 0;
+    payload.entryCount = survey.count;
+    for (std::uint64_t i = 0; i < survey.count; ++i) {
+        const bool kept = payload.entries.size() < kMaximumEntriesKept;
+        if (!kept && (payload.matchingEntry || !artefact)) break;
+        Entry entry = entryAt(survey, i, artefact);
+        if (entry.matches && !payload.matchingEntry) payload.matchingEntry = entry;
+        if (kept) payload.entries.push_back(std::move(entry));
+    }
+    return payload;
+}
+
+Range rangeIn(ByteView bytes, const std::byte* start, std::uint64_t length) {
+    return {static_cast<std::uint64_t>(start - bytes.data()), length};
+}
+
+}  // namespace
+
+Ticket gatherTicket(ByteView bytes, std::optional<std::uint64_t> fileOffset,
+                    const std::optional<Hash>& artefactHash, trust::TrustService& service) {
+    const Offsets offsets(fileOffset);
+    Ticket ticket;
+    ticket.size = bytes.size();
+    ticket.fileOffset = fileOffset;
+
+    const satchel_survey frame = satchel_survey_container(bytes);
+    ticket.frameFault = offsets.fault(frame.fault, 0);
+    if (frame.header) {
+        ticket.version = frame.header->version;
+        ticket.statedCertificatesLength = frame.header->certificates_length;
+        ticket.statedPayloadLength = frame.header->payload_length;
+    }
+    if (frame.view.signed_data == nullptr) {
+        ticket.chain.reason = "there is no certificate that can be read";
+        return ticket;
+    }
+    const ByteView block(frame.view.certificates, frame.view.certificates_length);
+    ticket.certificateBlock = rangeIn(bytes, block.data(), block.size());
+    ticket.signatureField = rangeIn(bytes, frame.view.signature, frame.view.signature_length);
+    gatherCertificates(block, ticket);
+    ticket.certificateFault = certificateFaultOf(block, ticket, offsets);
+    judgeChain(bytes, frame.view, service, ticket);
+
+    const ByteView payload(frame.view.payload, frame.view.payload_length);
+    const tm_ticket_survey survey = tm_ticket_survey_payload(payload);
+    ticket.payload = gatherPayload(survey, rangeIn(bytes, payload.data(), payload.size()), artefactHash);
+    ticket.payload->fault = offsets.fault(survey.fault, ticket.payload->range.offset);
+    return ticket;
+}
+
+bool looksLikeTicket(ByteView bytes) {
+    const auto beginsWith = [](ByteView part, std::string_view magic) {
+        return part.size() >= magic.size() &&
+               std::ranges::equal(part.first(magic.size()), foundation::asBytes(magic));
+    };
+    if (beginsWith(bytes, kSatchelMagic)) return true;
+    const satchel_survey survey = satchel_survey_container(bytes);
+    return survey.view.payload != nullptr &&
+           beginsWith(ByteView(survey.view.payload, survey.view.payload_length), kTicketMagic);
+}
+
+std::optional<Fault> firstFaultOf(const Ticket& ticket) {
+    const Offsets offsets(ticket.fileOffset);
+    if (ticket.frameFault) return ticket.frameFault;
+    if (ticket.certificateFault) return ticket.certificateFault;
+    if (!ticket.chain.trusted) {
+        std::uint64_t offset = ticket.certificateBlock ? ticket.certificateBlock->offset : 0;
+        for (const Link& link : ticket.chain.links) {
+            if (link.error.empty() || !ticket.chain.reason.ends_with(link.error)) continue;
+            const auto found =
+                std::find_if(ticket.certificates.begin(), ticket.certificates.end(),
+                             [&](const Certificate& one) { return one.description.summary == link.title; });
+            if (found != ticket.certificates.end()) offset = found->range.offset;
+            break;
+        }
+        return offsets.fault("the chain is not trusted: " + ticket.chain.reason, offset);
+    }
+    if (ticket.signature != Signature::verifies)
+        return offsets.fault("the signature does not verify", ticket.signatureField->offset);
+    return ticket.payload ? ticket.payload->fault : std::nullopt;
+}
+
+}  // namespace pinwell::inspect

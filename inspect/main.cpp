@@ -1,0 +1,103 @@
+// pinwell-inspect: shows everything about an artefact that bears on its ticket. Reads only; no network.
+#include <sysexits.h>
+#include <unistd.h>
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <csignal>
+#include <cstdio>
+#include <cstdlib>
+#include <exception>
+#include <string>
+#include <vector>
+
+#include "foundation/format.h"
+#include "foundation/process.h"
+#include "inspect/gather.h"
+#include "inspect/render_text.h"
+#include "src/host_platform.h"
+#include "src/messages.h"
+
+namespace {
+
+using namespace pinwell;
+
+struct Arguments {
+    std::vector<std::string> paths;
+    bool asJson = false;
+};
+
+void complain(std::string_view text) {
+    const std::string line = "pinwell-inspect: " + std::string(text) + "\n";
+    std::fwrite(line.data(), 1, line.size(), stderr);
+}
+
+bool write(const std::string& text) {
+    return std::fwrite(text.data(), 1, text.size(), stdout) == text.size() && std::fflush(stdout) == 0;
+}
+
+/// Only where somebody sees it, and never against their wish (https://no-color.org).
+bool wantsColour() {
+    const char* const noColour = std::getenv("NO_COLOR");
+    const char* const terminal = std::getenv("TERM");
+    const bool dumb = terminal != nullptr && std::string_view(terminal) == "dumb";
+    return isatty(STDOUT_FILENO) == 1 && !dumb && (noColour == nullptr || *noColour == '\0');
+}
+
+int inspectAll(const Arguments& arguments) {
+    // What the tool's own functions would say is in the report.
+    verboseLevel = kVerbosityQuiet;
+    const HostPlatform host([](int) {});
+    const inspect::Inspector inspector(host.services());
+    const bool colour = wantsColour();
+    int worst = EX_OK;
+    bool first = true;
+    for (const std::string& path : arguments.paths) {
+        const inspect::Report report = inspector.inspect(path);
+        const std::string text = (first ? "" : "\n") + inspect::renderText(report, colour);
+        first = false;
+        if (!write(text)) {
+            complain("cannot write to standard output");
+            return EX_IOERR;
+        }
+        worst = std::max(worst, inspect::exitStatusOf(report.outcome));
+    }
+    return worst;
+}
+
+int run(int argc, char** argv) {
+    Arguments arguments;
+    CLI::App app(
+        "Shows everything about an artefact that bears on its ticket: the code signature, where the "
+        "ticket sits, what it says, and whether it is good. Changes nothing and uses no network.",
+        "pinwell-inspect");
+    app.set_version_flag("--version", "pinwell-inspect " PINWELL_VERSION);
+    app.add_option("PATH", arguments.paths, "A bundle, disk image or package, or a ticket file by itself")
+        ->required();
+    app.footer(
+        "Exit status: 0 every ticket is good; 65 a ticket is missing or not acceptable; 66 a path cannot\n"
+        "be read or is nothing that carries a ticket; 64 wrong usage. Of several paths the highest counts.");
+    try {
+        app.parse(argc, argv);
+    } catch (const CLI::Success& request) {
+        return app.exit(request);  // help, version
+    } catch (const CLI::ParseError& error) {
+        complain(foundation::escapeForTerminal(error.what()));
+        return EX_USAGE;
+    }
+    return inspectAll(arguments);
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    foundation::occupyStandardStreams();
+    // A reader that has gone away is a failed write.
+    std::signal(SIGPIPE, SIG_IGN);
+    try {
+        return run(argc, argv);
+    } catch (const std::exception& error) {
+        complain(foundation::escapeForTerminal(error.what()));
+        return EX_SOFTWARE;
+    }
+}

@@ -1,0 +1,199 @@
+// What was found out about one path: a plain data model, made by gather.h and shown by the two renderings.
+//
+// Texts that came from a file are as they were found, whatever is in them; a rendering escapes them. What is
+// damaged carries a fault, and what could be read in spite of it is there. Offsets count bytes.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <variant>
+#include <vector>
+
+#include "codesign/code_description.h"
+#include "foundation/bytes.h"
+#include "trust/certificate_description.h"
+
+namespace pinwell::inspect {
+
+using foundation::Data;
+
+/// The most of each list that is kept; beyond it there is a count. A ticket's own limit is some 800,000.
+inline constexpr std::size_t kMaximumEntriesKept = 65'536;
+inline constexpr std::size_t kMaximumTrailersKept = 1024;
+inline constexpr std::size_t kMaximumCertificatesKept = 16;
+
+struct Range {
+    std::uint64_t offset = 0;
+    std::uint64_t length = 0;
+
+    bool operator==(const Range&) const = default;
+};
+
+/// Something that is wrong: one line without a full stop.
+struct Fault {
+    std::string rule;
+    std::optional<std::uint64_t> offset;      // in the ticket
+    std::optional<std::uint64_t> fileOffset;  // in the file that holds it
+
+    bool operator==(const Fault&) const = default;
+};
+
+/// A code hash with the number of its digest type; 0 when that is not known.
+struct Hash {
+    std::uint32_t algorithm = 0;
+    Data bytes;
+
+    bool operator==(const Hash&) const = default;
+};
+
+enum class Kind { bundle, executable, diskImage, package, ticket, other };
+
+/// The path itself.
+struct Item {
+    std::string typeIdentifier;
+    std::string typeDescription;
+    std::optional<std::uint64_t> size;  // of a file
+};
+
+// Where a ticket sits.
+
+/// Contents/CodeResources of a bundle, or the file itself.
+struct FilePlace {
+    std::string path;
+    std::optional<Fault> fault;  // there is something, and it is no ticket file
+};
+
+struct SuperblobPlace {
+    std::uint64_t trailerOffset = 0;
+    std::optional<Range> superblob;  // nothing when unsigned
+    std::vector<codesign::BlobDescription> blobs;
+    std::size_t blobCount = 0;  // as stated
+    std::optional<Fault> fault;
+};
+
+/// One record behind a package's archive, the last one first.
+struct Trailer {
+    std::uint64_t recordOffset = 0;
+    std::uint16_t version = 0;
+    std::uint16_t type = 0;
+    Range data;
+    std::string problem;
+};
+
+struct TrailerPlace {
+    std::vector<Trailer> trailers;
+    std::size_t trailerCount = 0;
+    bool hasTerminator = false;
+    std::optional<Fault> fault;
+};
+
+using Place = std::variant<std::monostate, FilePlace, SuperblobPlace, TrailerPlace>;
+
+// The ticket.
+
+struct Certificate {
+    Range range;  // in the ticket
+    trust::CertificateDescription description;
+};
+
+/// One certificate of the chain that was judged, leaf first, and what is wrong with it.
+struct Link {
+    std::string title;
+    std::string error;
+};
+
+struct Chain {
+    bool trusted = false;
+    std::string reason;  // why not; names the certificate at fault
+    std::vector<Link> links;
+};
+
+enum class Signature { verifies, fails, unchecked };
+
+struct Entry {
+    std::uint64_t index = 0;
+    Hash hash;  // empty when it cannot be copied out
+    bool isUsable = false;
+    bool matches = false;  // it is the artefact's
+};
+
+struct Payload {
+    Range range;             // in the ticket
+    bool hasHeader = false;  // otherwise it is too short for one, and what follows says nothing
+    std::uint16_t version = 0;
+    std::uint16_t hashLength = 0;
+    std::uint32_t statedCount = 0;
+    std::uint32_t flags = 0;
+    std::uint64_t signatureTime = 0;
+    bool isRevoked = false;
+
+    std::uint64_t entryCount = 0;
+    std::vector<Entry> entries;          // the first kMaximumEntriesKept
+    std::optional<Entry> matchingEntry;  // wherever it is
+    std::optional<Fault> fault;
+};
+
+struct Ticket {
+    std::uint64_t size = 0;
+    std::optional<std::uint64_t> fileOffset;  // in the file that holds it
+
+    std::optional<std::uint16_t> version;
+    std::uint32_t statedCertificatesLength = 0;
+    std::uint32_t statedPayloadLength = 0;
+    std::optional<Range> certificateBlock;
+    std::optional<Range> signatureField;
+    std::optional<Fault> frameFault;
+
+    std::vector<Certificate> certificates;
+    std::vector<Range> unreadable;  // of the certificate block
+    std::optional<Fault> certificateFault;
+
+    Chain chain;
+    Signature signature = Signature::unchecked;
+    std::optional<Payload> payload;  // nothing when the container is too short to have one
+};
+
+/// In the order of gravity: the worst of several paths decides the exit status.
+enum class Outcome {
+    good,        // a genuine ticket that lists the artefact and is not marked revoked
+    noTicket,    // none is stapled
+    refused,     // there is one, and it is not acceptable
+    revoked,     // genuine, and marked as revoked
+    unreadable,  // the path cannot be read, or is nothing that carries a ticket
+};
+
+struct Report {
+    std::string path;
+    std::string platformDirectory;  // where the trusted roots come from
+    Kind kind = Kind::other;
+    std::optional<Item> item;
+
+    std::optional<codesign::CodeDescription> code;  // of bundles, executables and disk images
+    std::optional<Hash> codeHash;
+    bool isMadeUpHash = false;  // of an unsigned disk image
+    std::string recordName;     // what a lookup would ask for; empty without a hash
+
+    Place place;
+    std::optional<Ticket> ticket;
+
+    Outcome outcome = Outcome::unreadable;
+    std::string conclusion;      // a plain sentence
+    std::optional<Fault> fault;  // the first rule that fails
+};
+
+/// 0, 65 or 66.
+int exitStatusOf(Outcome outcome);
+
+/// "SHA-256" and so on; "unnamed" for 0, "unknown" for others.
+std::string_view algorithmName(std::uint32_t algorithm);
+std::string_view kindName(Kind kind);
+/// What stands in a slot of a superblob.
+std::string_view slotName(std::uint32_t slot);
+std::string_view trailerTypeName(std::uint16_t type);
+/// "64-bit ARM", or the number in hexadecimal.
+std::string cpuTypeName(std::uint32_t cpuType);
+/// Seconds since the epoch as a date, for times that have four-digit years.
+std::optional<std::string> timeText(std::uint64_t seconds);
+
+}  // namespace pinwell::inspect
