@@ -14,6 +14,7 @@
 #include "foundation/format.h"
 #include "foundation/process.h"
 #include "inspect/gather.h"
+#include "inspect/render_json.h"
 #include "inspect/render_text.h"
 #include "src/host_platform.h"
 #include "src/messages.h"
@@ -54,7 +55,8 @@ int inspectAll(const Arguments& arguments) {
     bool first = true;
     for (const std::string& path : arguments.paths) {
         const inspect::Report report = inspector.inspect(path);
-        const std::string text = (first ? "" : "\n") + inspect::renderText(report, colour);
+        const std::string text = arguments.asJson ? inspect::renderJson(report)
+                                                  : (first ? "" : "\n") + inspect::renderText(report, colour);
         first = false;
         if (!write(text)) {
             complain("cannot write to standard output");
@@ -74,6 +76,7 @@ int run(int argc, char** argv) {
     app.set_version_flag("--version", "pinwell-inspect " PINWELL_VERSION);
     app.add_option("PATH", arguments.paths, "A bundle, disk image or package, or a ticket file by itself")
         ->required();
+    app.add_flag("--json", arguments.asJson, "Print one JSON object a path, each on a line");
     app.footer(
         "Exit status: 0 every ticket is good; 65 a ticket is missing or not acceptable; 66 a path cannot\n"
         "be read or is nothing that carries a ticket; 64 wrong usage. Of several paths the highest counts.");
