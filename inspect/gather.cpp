@@ -108,8 +108,8 @@ class TrailerWalk {
     void keep(Trailer trailer) {
         // The tool looks no further than the ticket; what is wrong behind it is shown and no more.
         if (!trailer.problem.empty() && !into_.fault && !ticket_)
-            into_.fault =
-                Fault{"a trailer record is damaged: " + trailer.problem, std::nullopt, trailer.recordOffset};
+            into_.fault = Fault{"a trailer record is damaged (" + trailer.problem + ")", std::nullopt,
+                                trailer.recordOffset};
         ++into_.trailerCount;
         if (into_.trailers.size() < kMaximumTrailersKept) into_.trailers.push_back(std::move(trailer));
     }
@@ -173,13 +173,17 @@ void concludeWithTicket(Report& report) {
         report.conclusion = "The ticket is genuine, and it marks the software as revoked.";
         return;
     }
-    const bool genuine = !report.fault;
-    if (genuine) report.fault = listingFaultOf(report);
+    if (report.fault) {
+        report.outcome = Outcome::refused;
+        report.conclusion = "The ticket is not acceptable: " + report.fault->rule + ".";
+        return;
+    }
+    report.fault = listingFaultOf(report);
     if (report.fault) {
         report.outcome = Outcome::refused;
         report.conclusion =
-            std::string(genuine ? "The ticket is genuine, but " : "The ticket is not acceptable: ") +
-            report.fault->rule + ".";
+            report.codeHash ? "The ticket is genuine, but it does not list this file."
+                            : "The ticket is genuine, but the file has no valid signature for it to list.";
         return;
     }
     report.outcome = Outcome::good;

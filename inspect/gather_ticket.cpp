@@ -232,7 +232,7 @@ std::optional<Fault> firstFaultOf(const Ticket& ticket) {
             if (found != ticket.certificates.end()) offset = found->range.offset;
             break;
         }
-        return offsets.fault("the chain is not trusted: " + ticket.chain.reason, offset);
+        return offsets.fault("the chain is not trusted (" + ticket.chain.reason + ")", offset);
     }
     if (ticket.signature != Signature::verifies)
         return offsets.fault("the signature does not verify", ticket.signatureField->offset);

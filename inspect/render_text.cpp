@@ -58,7 +58,9 @@ class Page {
         plain(padded("  " + label, kValueColumn) + value);
     }
 
-    void fault(const std::string& what) { line("", coloured(kRed, "! " + what)); }
+    void fault(const std::string& what) {
+        line("", coloured(kRed, "! " + foundation::escapeForTerminal(what)));
+    }
     void fault(const std::optional<Fault>& fault) {
         if (fault) this->fault(fault->rule + placeOf(*fault));
     }
@@ -69,7 +71,7 @@ class Page {
         if (fault.offset) text += format(", at offset %llu of the ticket", *fault.offset);
         if (!fault.fileOffset || fault.fileOffset == fault.offset) return text;
         return text + (fault.offset ? format(" (%llu of the file)", *fault.fileOffset)
-                                    : format(", at offset %llu", *fault.fileOffset));
+                                    : format(", at offset %llu of the file", *fault.fileOffset));
     }
 
     /// A row for each element, and how many more there are of `total`.
@@ -98,7 +100,8 @@ std::string flagsText(std::uint32_t flags) {
 void showItem(const Report& report, Page& page) {
     if (!report.item) return;
     const Item& item = *report.item;
-    const std::string kind(kindName(report.kind));
+    const std::string kind =
+        report.kind == Kind::other ? format("%@", item.typeDescription) : std::string(kindName(report.kind));
     const bool says = item.typeDescription != kind;
     page.line("Kind", kind + (says ? format(" (%@, %@)", item.typeDescription, item.typeIdentifier)
                                    : format(" (%@)", item.typeIdentifier)));
@@ -125,8 +128,12 @@ void showSignature(const codesign::SignatureDescription& signature, Page& page) 
         text += format(", %s", rangeText({signature.place->offset, signature.place->length}));
     page.line("Signature", text);
     if (!signature.problem.empty() && verdict == "not valid") page.fault(signature.problem);
-    const auto chosen = std::find_if(signature.directories.begin(), signature.directories.end(),
-                                     [](const auto& one) { return one.chosen; });
+    auto chosen = std::find_if(signature.directories.begin(), signature.directories.end(),
+                               [](const auto& one) { return one.chosen; });
+    if (chosen == signature.directories.end()) {
+        chosen = std::find_if(signature.directories.begin(), signature.directories.end(),
+                              [](const auto& one) { return one.problem.empty(); });
+    }
     if (chosen != signature.directories.end()) {
         page.line("Identifier", format("%@", chosen->identifier));
         page.line("Team", chosen->teamIdentifier ? format("%@", *chosen->teamIdentifier) : "none");
@@ -157,7 +164,7 @@ void showCode(const Report& report, Page& page) {
 }
 
 void showHash(const Report& report, Page& page) {
-    if (report.kind == Kind::ticket) return;
+    if (report.kind == Kind::ticket || report.kind == Kind::other) return;
     if (!report.codeHash) {
         page.line("Code hash", "none");
         return;
@@ -238,13 +245,13 @@ void showVerdict(const Report& report, Page& page) {
         ticket.signatureField ? format(", %s", rangeText(*ticket.signatureField)) : std::string();
     switch (ticket.signature) {
         case Signature::verifies:
-            page.line("Signed", "the signature verifies" + place);
+            page.line("Signature", "verifies" + place);
             break;
         case Signature::fails:
-            page.line("Signed", "the signature does not verify" + place);
+            page.line("Signature", "does not verify" + place);
             break;
         case Signature::unchecked:
-            page.line("Signed", "the signature could not be checked" + place);
+            page.line("Signature", "could not be checked" + place);
             break;
     }
 }
@@ -276,7 +283,8 @@ void showTicket(const Report& report, Page& page) {
     page.gap();
     std::string size = bytesText(ticket.size);
     if (ticket.fileOffset && *ticket.fileOffset != 0) size += format(" at offset %llu", *ticket.fileOffset);
-    page.line("Ticket", size + (ticket.version ? format(", container version %u", *ticket.version) : ""));
+    if (ticket.version) size += format(", container version %u", *ticket.version);
+    page.line("Ticket", size + "; offsets below count from its start");
     page.fault(ticket.frameFault);
     showCertificates(ticket, page);
     showVerdict(report, page);

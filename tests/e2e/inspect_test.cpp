@@ -79,7 +79,7 @@ TEST_F(Inspect, EndsWith65WithoutAGoodTicket) {
                 Ended(65, Contains("  The ticket is genuine, and it marks the software as revoked.")));
     stapleByHand(ticketForOthers());
     EXPECT_THAT(inspect({bundle}),
-                Ended(65, Contains("  The ticket is genuine, but the ticket does not list this file.")));
+                Ended(65, Contains("  The ticket is genuine, but it does not list this file.")));
 }
 
 TEST_F(Inspect, EndsWith66ForWhatCannotBeInspected) {

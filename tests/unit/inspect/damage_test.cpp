@@ -1,6 +1,7 @@
 // Damaged tickets and damaged places: what is wrong is said, and the rest is shown.
 #include "inspect/gather_ticket.h"
 #include "inspect_fixture.h"
+#include "src/DownloadDelegate.h"
 #include "src/tm_ticket.h"
 #include "support/disk_image_builder.h"
 #include "support/package_builder.h"
@@ -185,6 +186,36 @@ TEST_F(DamagedPlace, ADamagedTerminatorIsShownAndDoesNotMatter) {
     const Report report = inspect(write(package.name, contents));
     EXPECT_EQ(report.outcome, Outcome::good) << report.conclusion;
     EXPECT_NE(std::get<TrailerPlace>(report.place).trailers.back().problem, "");
+}
+
+TEST_F(DamagedPlace, IsGoodExactlyWhenTheToolAcceptsTheStapledTicket) {
+    const auto toolAccepts = [&](const std::string& path) {
+        const auto file = PWHashedFile::initWithFileURL(foundation::URL::fileURLWithPath(path), services());
+        return file->appropriateExitCode() == kExitOK &&
+               DownloadDelegate(file, services()).isExistingTicketValid();
+    };
+    const Artefact package = signedPackage();
+    const Artefact image = unsignedImage();
+    const auto compare = [&](const Artefact& artefact, std::size_t begin, std::size_t end) {
+        const std::string whole = artefact.stapledWith(ticketFor(artefact));
+        for (std::size_t at = begin; at < end; ++at) {
+            std::string contents = whole;
+            contents[at] = static_cast<char>(contents[at] ^ 2);
+            const std::string path = write(artefact.name, contents);
+            EXPECT_EQ(inspect(path).outcome == Outcome::good, toolAccepts(path))
+                << artefact.name << " at " << at;
+        }
+        const std::string path = write(artefact.name, whole);
+        EXPECT_TRUE(toolAccepts(path));
+        EXPECT_EQ(inspect(path).outcome, Outcome::good);
+    };
+    const std::size_t packageEnd = package.stapledWith(ticketFor(package)).size();
+    compare(package, packageEnd - 16, packageEnd);
+    compare(package, package.contents.size(), package.contents.size() + 16);
+    const std::size_t imageEnd = image.stapledWith(ticketFor(image)).size();
+    compare(image, 100'000, 100'000 + 28);
+    compare(image, imageEnd - 512, imageEnd - 504);
+    compare(image, imageEnd - 512 + 296, imageEnd - 512 + 312);
 }
 
 TEST_F(DamagedPlace, ACodeDirectoryThatCannotBeReadIsSaidToBeSo) {

@@ -74,7 +74,7 @@ TEST_F(Inspection, OfARevokedTicketSaysSo) {
 TEST_F(Inspection, OfATicketForOthersSaysThatItListsNotThisFile) {
     const Report report = inspect(bundle(sealed(TicketPayloadBuilder().entry(2, hashOf(1)))));
     EXPECT_EQ(report.outcome, Outcome::refused);
-    EXPECT_EQ(report.conclusion, "The ticket is genuine, but the ticket does not list this file.");
+    EXPECT_EQ(report.conclusion, "The ticket is genuine, but it does not list this file.");
     EXPECT_EQ(report.fault->offset, report.ticket->payload->range.offset + 24);
 }
 
