@@ -21,8 +21,8 @@ namespace {
 using foundation::ByteView;
 using foundation::URL;
 
-/// Trailers that are looked at; a chain may have millions of empty ones.
-constexpr std::size_t kMaximumTrailersWalked = 65'536;
+/// Trailers that are looked at: as many empty ones as the tool would go past on its way to the ticket.
+constexpr std::size_t kMaximumTrailersWalked = kMaximumUnknownTrailers / kTrailerSize + 1;
 
 // A URL is made absolute with the working directory; a path is shown as it was given.
 std::optional<std::uint64_t> sizeOf(const std::string& path) {
@@ -99,6 +99,11 @@ class TrailerWalk {
         }
         found.data = {recordOffset - record.length(), record.length()};
         const bool isTicket = found.type == kTicketTrailerType;
+        if (!isTicket && !ticket_) unknownBytes_ += found.data.length + kTrailerSize;
+        if (unknownBytes_ > kMaximumUnknownTrailers) {
+            into_.fault = Fault{"the unknown trailers are too long", std::nullopt, recordOffset};
+            return std::nullopt;
+        }
         const Range data = found.data;
         keep(std::move(found));
         if (isTicket && !ticket_) ticket_ = data;
@@ -117,17 +122,17 @@ class TrailerWalk {
     files::FileHandle& file_;
     TrailerPlace& into_;
     std::optional<Range> ticket_;
+    std::uint64_t unknownBytes_ = 0;  // behind the ticket
 };
 
 /// The ticket's bytes within a superblob: the last one counts, as for the tool.
-std::optional<Range> ticketIn(const SuperblobPlace& place, std::size_t superblobSize) {
+std::optional<Range> ticketIn(ByteView superblob) {
     std::optional<Range> found;
-    for (const codesign::BlobDescription& blob : place.blobs) {
-        if (blob.slot != kTicketSlotType || !blob.length) continue;
-        const std::uint64_t start = std::uint64_t{blob.offset} + kBlobHeaderSize;
-        if (start > superblobSize) continue;
-        const std::uint64_t stated = *blob.length < kBlobHeaderSize ? 0 : *blob.length - kBlobHeaderSize;
-        found = Range{start, std::min<std::uint64_t>(stated, superblobSize - start)};
+    std::uint32_t count = 0;
+    for (const codesign::SurveyedBlob& blob :
+         codesign::surveySuperBlob(superblob, codesign::kMaximumBlobCount, count)) {
+        if (blob.slot != kTicketSlotType || blob.bytes.size() < kBlobHeaderSize) continue;
+        found = Range{blob.offset + std::uint64_t{kBlobHeaderSize}, blob.bytes.size() - kBlobHeaderSize};
     }
     return found;
 }
@@ -241,7 +246,7 @@ void Inspector::gatherImage(const URL& url, Report& report) const {
         codesign::SignatureDescription table = codesign::describeSignature(image.superblob());
         place.blobs = std::move(table.blobs);
         place.blobCount = table.blobCount;
-        if (const auto found = ticketIn(place, image.superblob().size())) {
+        if (const auto found = ticketIn(image.superblob())) {
             const ByteView bytes = ByteView(image.superblob()).subspan(found->offset, found->length);
             report.ticket =
                 gatherTicket(bytes, image.csStart() + found->offset, report.codeHash, platform_.trust);
@@ -298,7 +303,11 @@ Report Inspector::inspect(const std::string& path) const {
     report.item = Item{properties->typeIdentifier, properties->localizedTypeDescription, std::nullopt};
     const auto regular = platform_.files.isRegularFile(url);
     const bool isFile = regular && *regular;
-    if (isFile) report.item->size = sizeOf(path);
+    if (isFile) {
+        report.item->size = sizeOf(path);
+        if (const auto opened = platform_.files.openForReading(url); !opened)
+            return unreadable(report, "The file cannot be read: " + reasonOf(opened.error()) + ".");
+    }
 
     const std::string extension = url.pathExtension();
     switch (assessmentClassForUTI(platform_.types, properties->typeIdentifier, extension)) {
@@ -314,6 +323,7 @@ Report Inspector::inspect(const std::string& path) const {
             break;
         case AssessmentClass::package:
             report.kind = Kind::package;
+            if (!isFile) return unreadable(report, "A package that is a directory carries no ticket.");
             gatherPackage(url, report);
             break;
         case AssessmentClass::unknown:

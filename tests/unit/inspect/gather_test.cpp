@@ -1,5 +1,8 @@
 // What is found out about artefacts of every kind whose tickets are whole.
+#include <cerrno>
+
 #include "inspect_fixture.h"
+#include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "support/disk_image_builder.h"
 #include "support/file_properties.h"
 #include "support/package_builder.h"
@@ -233,6 +236,54 @@ TEST_F(Inspection, OfWhatCarriesNoTicketSaysSo) {
     EXPECT_THAT(missing.conclusion, HasSubstr("The path cannot be read"));
     makeDirectory(platform.directory / "folder");
     EXPECT_EQ(inspect(platform.directory / "folder").outcome, Outcome::unreadable);
+}
+
+TEST_F(Inspection, OfAFileThatCannotBeOpenedSaysWhyNot) {
+    const Artefact package = signedPackage();
+    const std::string path = write(package.name, package.contents);
+    platform.files.fail("openForReading", EACCES);
+    const Report report = inspect(path);
+    EXPECT_EQ(report.outcome, Outcome::unreadable);
+    EXPECT_EQ(report.conclusion, "The file cannot be read: Permission denied.");
+}
+
+TEST_F(Inspection, OfAPackageThatIsADirectorySaysSo) {
+    makeDirectory(platform.directory / "Old.pkg");
+    const Report report = inspect(platform.directory / "Old.pkg");
+    EXPECT_EQ(report.outcome, Outcome::unreadable);
+    EXPECT_EQ(report.conclusion, "A package that is a directory carries no ticket.");
+}
+
+TEST_F(Inspection, OfAnImageFindsTheTicketBehindMoreBlobsThanItDescribes) {
+    const Artefact image = unsignedImage();
+    SuperBlobBuilder superblob;
+    for (std::uint32_t i = 0; i < codesign::kMaximumBlobsDescribed + 1; ++i)
+        superblob.blob(0x20000 + i, makeBlob(1, {}));
+    superblob.blob(kSampleTicketSlot, ticketBlob(foundation::toString(ticketFor(image))));
+    const auto builder = DiskImageBuilder().data(irregularData(100'000)).superblob(superblob);
+    const Report report = inspect(write(image.name, foundation::toString(builder.build())));
+    EXPECT_EQ(report.outcome, Outcome::good) << report.conclusion;
+    EXPECT_THAT(std::get<SuperblobPlace>(report.place).blobs, SizeIs(codesign::kMaximumBlobsDescribed));
+    EXPECT_EQ(std::get<SuperblobPlace>(report.place).blobCount, codesign::kMaximumBlobsDescribed + 2);
+}
+
+TEST_F(Inspection, OfAPackageGoesPastAsManyTrailersAsTheToolDoes) {
+    const Artefact package = signedPackage();
+    const std::string stapledPackage = package.stapledWith(ticketFor(package));
+    std::string trailers;
+    const std::string one = foundation::toString(makeTrailer({}));
+    for (std::size_t i = 0; i < 2000; ++i) trailers += one;
+    const Report report = inspect(write(package.name, stapledPackage + trailers));
+    EXPECT_EQ(report.outcome, Outcome::good) << report.conclusion;
+    EXPECT_THAT(std::get<TrailerPlace>(report.place).trailers, SizeIs(inspect::kMaximumTrailersKept));
+    EXPECT_EQ(std::get<TrailerPlace>(report.place).trailerCount, 2002U);
+
+    TrailerFields huge;
+    const Data data(kMaximumUnknownTrailers, std::byte{0});
+    const std::string beyond = foundation::toString(makeTrailer(huge, data));
+    const Report refused = inspect(write(package.name, stapledPackage + beyond));
+    EXPECT_EQ(refused.outcome, Outcome::refused);
+    EXPECT_EQ(refused.fault->rule, "the unknown trailers are too long");
 }
 
 TEST_F(Inspection, OfAChainWithAnotherRootNamesTheCertificateAtFault) {
