@@ -36,7 +36,7 @@ bool wrapsAddressSpace(const std::byte* start, std::uint64_t length) {
     return length > std::numeric_limits<std::uintptr_t>::max() - std::bit_cast<std::uintptr_t>(start);
 }
 
-std::optional<ticket_fault> findFault(ByteView container, const satchel_survey::fields& header, bool magic) {
+std::optional<ticket_fault> findFault(ByteView container, const satchel_fields& header, bool magic) {
     if (!magic) return ticket_fault{0, "the container does not begin with its magic, \"s8ch\""};
     if (header.version != kSatchelVersion) return ticket_fault{4, "the container's version is not 1"};
     if (header.payload_length == 0) return ticket_fault{12, "the payload's length is 0"};
@@ -50,7 +50,7 @@ std::optional<ticket_fault> findFault(ByteView container, const satchel_survey::
 
 // Where the certificate block ends when the lengths do not add up: they say so in two ways, and the block
 // itself in a third.
-std::uint64_t certificatesLengthIn(ByteView parts, const satchel_survey::fields& header) {
+std::uint64_t certificatesLengthIn(ByteView parts, const satchel_fields& header) {
     const std::optional<der::Element> block = der::readElement(parts);
     const std::uint64_t stated = header.certificates_length;
     const std::uint64_t own = block ? block->whole.size() : stated;

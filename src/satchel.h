@@ -64,16 +64,17 @@ struct satchel_view {
     bool operator==(const satchel_view&) const = default;
 };
 
-/// What a container says of itself, whether or not it keeps to the rules: for showing a damaged one. The
-/// fields are as stored; there are none when it is shorter than its header.
+/// The fields of a container's header, as stored.
+struct satchel_fields {
+    std::uint16_t version = 0;
+    std::uint16_t reserved = 0;
+    std::uint32_t certificates_length = 0;
+    std::uint32_t payload_length = 0;
+};
+
+/// What a container says of itself, whether or not it keeps to the rules: for showing a damaged one.
 struct satchel_survey {
-    struct fields {
-        std::uint16_t version = 0;
-        std::uint16_t reserved = 0;
-        std::uint32_t certificates_length = 0;
-        std::uint32_t payload_length = 0;
-    };
-    std::optional<fields> header;
+    std::optional<satchel_fields> header;  // nothing when it is shorter than that
 
     /// Where the parts are, as good as that can be told. When the lengths do not add up, the one that does
     /// not fit the certificate block's own is taken to be wrong. A part that is not there is null.

@@ -62,17 +62,19 @@ std::int32_t satchel_get_validated_tm_ticket(const std::byte* container, std::ui
 /// Decodes a payload that has been verified. `ticket` is written only on success.
 std::int32_t tm_ticket_decode(const std::byte* payload, std::int64_t size, tm_ticket** ticket);
 
+/// The fields of a payload's header, as stored.
+struct tm_ticket_fields {
+    std::uint16_t version = 0;
+    std::uint16_t hash_length = 0;
+    std::uint32_t count = 0;
+    std::uint32_t flags = 0;
+    std::uint64_t signature_time = 0;
+};
+
 /// What a payload says, whether or not it keeps to the rules: for showing a damaged one. The fields are as
 /// stored; there are none when it is shorter than its header.
 struct tm_ticket_survey {
-    struct fields {
-        std::uint16_t version = 0;
-        std::uint16_t hash_length = 0;
-        std::uint32_t count = 0;
-        std::uint32_t flags = 0;
-        std::uint64_t signature_time = 0;
-    };
-    std::optional<fields> header;
+    std::optional<tm_ticket_fields> header;  // nothing when it is shorter than that
 
     /// How the entries are read: as the header says or, when version, hash length and count do not go
     /// together with the payload's size, as most of them do.
