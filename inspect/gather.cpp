@@ -24,7 +24,6 @@ using foundation::URL;
 /// Trailers that are looked at: as many empty ones as the tool would go past on its way to the ticket.
 constexpr std::size_t kMaximumTrailersWalked = kMaximumUnknownTrailers / kTrailerSize + 1;
 
-// A URL is made absolute with the working directory; a path is shown as it was given.
 std::optional<std::uint64_t> sizeOf(const std::string& path) {
     std::error_code error;
     const auto size = std::filesystem::file_size(path, error);
@@ -32,7 +31,7 @@ std::optional<std::uint64_t> sizeOf(const std::string& path) {
 }
 
 std::string reasonOf(const foundation::Error& error) {
-    std::string reason = error.localizedFailureReason();
+    const std::string& reason = error.localizedFailureReason();
     return reason.empty() ? error.localizedDescription() : reason;
 }
 
@@ -294,6 +293,7 @@ bool Inspector::gatherBareTicket(const URL& url, bool mustLookLikeOne, Report& r
 
 Report Inspector::inspect(const std::string& path) const {
     Report report;
+    // A URL is made absolute with the working directory; a path is shown as it was given.
     report.path = path;
     report.platformDirectory = platform_.directory.path();
     const URL url = URL::fileURLWithPath(path);

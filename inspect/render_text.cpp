@@ -8,7 +8,6 @@
 namespace pinwell::inspect {
 namespace {
 
-using codesign::CodeKind;
 using foundation::format;
 using foundation::toHex;
 
