@@ -51,7 +51,9 @@ class PWHashedFlatPackage : public PWHashedFile {
     bool readSize(files::FileHandle& file);
     std::optional<Data> walkTrailers(files::FileHandle& file);
     std::optional<Data> readTicket(files::FileHandle& file, std::uint64_t start, std::uint32_t length);
-    void writeTrailers(files::FileHandle& file, foundation::ByteView ticket, const std::string& targetName);
+    Data tailWith(foundation::ByteView ticket) const;
+    std::optional<URL> saveMovedTrailers(files::FileHandle& file, foundation::ByteView tail) const;
+    void writeTail(files::FileHandle& file, foundation::ByteView tail, const std::string& targetName);
 
     std::uint64_t origEOL_ = 0;
     std::uint64_t ticketStart_ = 0;

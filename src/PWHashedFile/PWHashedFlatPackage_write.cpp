@@ -1,6 +1,7 @@
 // How a flat package gets its ticket, and loses it.
 #include <utility>
 
+#include "foundation/process.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "src/PWHashedFile/package_trailer.h"
 #include "src/messages.h"
@@ -44,9 +45,14 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
         NoisyLog("Could not create file handle to %@. %@", target.path(), held);
         return fail();
     }
+    std::optional<URL> copy;
     try {
-        writeTrailers(**opened, ticket, targetName);
+        const Data tail = tailWith(ticket);
+        copy = saveMovedTrailers(**opened, tail);
+        writeTail(**opened, tail, targetName);
+        if (copy) static_cast<void>(platform().files.removeItem(*copy));
     } catch (const files::FileHandleError& failure) {
+        if (copy) NoisyLog("The trailers of %@ are kept in %@.", targetName, copy->path());
         NoisyLog("Fatal error while %@ ticket to %@. %@.",
                  deleteExisting ? "deleting existing" : "writing new", target.path(), failure.what());
         return fail();
@@ -55,28 +61,48 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
     return true;
 }
 
+Data PWHashedFlatPackage::tailWith(ByteView ticket) const {
+    Data tail = dataToAppend_.value_or(Data{});
+    if (ticket.empty()) return tail;
+    const trailer_header record = ticketTrailer(static_cast<std::uint32_t>(ticket.size()));
+    tail.insert(tail.end(), ticket.begin(), ticket.end());
+    tail.insert(tail.end(), record.bytes.begin(), record.bytes.end());
+    return tail;
+}
+
+// Trailers of others can be had from nowhere else. When some are about to move, all that will be written is
+// saved until it has been written, behind the bytes that it belongs behind and with their offset in the name.
+std::optional<URL> PWHashedFlatPackage::saveMovedTrailers(files::FileHandle& file, ByteView tail) const {
+    if (!dataToAppend_ || ticketStart_ < kTrailerSize) return std::nullopt;
+    const std::uint64_t offset = ticketStart_ - kTrailerSize;
+    file.seek(offset);
+    Data saved = file.read(kTrailerSize);
+    saved.insert(saved.end(), tail.begin(), tail.end());
+
+    files::FileManager& files = platform().files;
+    const URL copy = files.temporaryDirectory().appendingPathComponent(
+        foundation::format("%@.%llu.pkgTrailers", foundation::globallyUniqueString(), offset));
+    const auto done = files.writeFile(saved, copy, files::FileManager::Writing::plain);
+    if (!done) throw files::FileHandleError(done.error().localizedFailureReason());
+    return copy;
+}
+
 // A write that is cut short must not leave a chain that ends in a terminator, or in a trailer of unknown
 // type, with no ticket in it: the next staple would write over the file from its first byte on. So the
 // terminator, without which a ticket is found just as well, comes last; and trailers that stood behind the
 // old ticket are made unrecognisable, by zeros behind them, before the new ones are written over them.
-void PWHashedFlatPackage::writeTrailers(files::FileHandle& file, ByteView ticket,
-                                        const std::string& targetName) {
+void PWHashedFlatPackage::writeTail(files::FileHandle& file, ByteView tail, const std::string& targetName) {
     const bool isFirst = ticketStart_ == 0 && !hasTrailers_;
     const std::uint64_t start = isFirst ? file.seekToEnd() : file.seek(ticketStart_);
     if (isFirst) ticketStart_ = start + kTrailerSize;
 
-    const std::uint64_t appended = dataToAppend_ ? dataToAppend_->size() : 0;
-    const std::uint64_t written = appended + (ticket.empty() ? 0 : ticket.size() + kTrailerSize);
-    if (origEOL_ < ticketStart_ + written) file.reserve(ticketStart_ + written - start);
+    const std::uint64_t newEnd = ticketStart_ + tail.size();
+    if (origEOL_ < newEnd) file.reserve(newEnd - start);
     std::uint64_t length = origEOL_;
     if (dataToAppend_) file.truncate(length += kTrailerSize);
 
     if (isFirst) file.seek(ticketStart_);
-    if (dataToAppend_) file.write(*dataToAppend_);
-    if (!ticket.empty()) {
-        file.write(ticket);
-        file.write(ticketTrailer(static_cast<std::uint32_t>(ticket.size())).bytes);
-    }
+    file.write(tail);
     const std::uint64_t end = file.position();
     if (isFirst) {
         file.seek(start);

@@ -17,6 +17,7 @@
 #include "e2e/fixture.h"
 #include "foundation/format.h"
 #include "support/environment.h"
+#include "support/package_builder.h"
 #include "support/volume.h"
 #include "system_call_trace.h"
 
@@ -153,12 +154,16 @@ class Crash : InMemory, public EndToEndTest, public testing::WithParamInterface<
             return;  // the next staple puts a chain of its own behind whatever is there
         }
         EXPECT_TRUE(now.starts_with(foundation::toString(irregularData(100'000))));
+        restore(artefact.path, ".dmgData");
+    }
+
+    void restore(const std::string& path, std::string_view extension) {
         std::vector<std::string> copies;
         for (const auto& entry : std::filesystem::directory_iterator(volume_ / "tmp"))
-            if (entry.path().extension() == ".dmgData") copies.push_back(entry.path());
+            if (entry.path().extension() == extension) copies.push_back(entry.path());
         ASSERT_EQ(copies.size(), 1U);
-        const ProcessResult restored = runProcess({.executable = RESTORE_IMAGE,
-                                                   .arguments = {artefact.path, copies.front()},
+        const ProcessResult restored = runProcess({.executable = RESTORE_ARTEFACT,
+                                                   .arguments = {path, copies.front()},
                                                    .environment = {{"PATH", "/usr/bin:/bin"}}});
         EXPECT_EQ(restored.exitStatus, 0) << restored.errors;
     }
@@ -184,6 +189,34 @@ TEST_P(Crash, LosesNoUnsignedImage) {
 
 TEST_P(Crash, LosesNoPackage) {
     interruptStapleOf(signedPackage());
+}
+
+// Those behind the old ticket are moved in front of the new one.
+TEST_P(Crash, LosesNoTrailersOfAPackage) {
+    if (const auto reason = missing()) GTEST_SKIP() << *reason;
+    const Artefact package = writeArtefact(signedPackage(), volume_ / "Sample.pkg");
+    const auto withChain = [&](PackageBuilder chain) { return package.contents + chain.archive({}).build(); };
+    const std::string older = foundation::toString(sealed(package.payload().entry(2, hashOf(1))));
+    const Data ticket = sealed(package.payload());
+    const std::string before = withChain(PackageBuilder().terminator().ticket(older).unknown("KEPT"));
+    const std::string after =
+        withChain(PackageBuilder().terminator().unknown("KEPT").ticket(foundation::toString(ticket)));
+    interruptEverywhere({.path = package.path,
+                         .ticket = ticket,
+                         .prepare =
+                             [&] {
+                                 clear();
+                                 writeFile(package.path, before);
+                             },
+                         .look = [&]() -> std::optional<std::string> { return readFile(package.path); },
+                         .after = after,
+                         .repair =
+                             [&] {
+                                 EXPECT_TRUE(readFile(package.path).starts_with(package.contents));
+                                 restore(package.path, ".pkgTrailers");
+                                 EXPECT_TRUE(readFile(package.path) == after);
+                             }},
+                        SIGKILL);
 }
 
 TEST_P(Crash, LeavesABundleThatCanBeStapledAgain) {

@@ -38,6 +38,8 @@ struct Subject {
     std::function<std::optional<std::string>(const std::optional<Data>&)> contentsWith;  // nothing: no file
     bool isBundle = false;
     bool isImage = false;
+    /// When it is not the same with the new ticket as it was with the old one.
+    std::function<std::string(const std::optional<Data>&)> afterWith = {};
 };
 
 Subject bundleIn(const std::string& directory) {
@@ -87,6 +89,7 @@ std::vector<Job> jobsFor(const Subject& subject) {
                           {"restaple shorter", longer, shorter},
                           {"restaple longer", shorter, longer}};
     if (!subject.isBundle) jobs.push_back({"delete", longer, std::nullopt});
+    if (subject.afterWith) jobs.erase(jobs.begin());  // it has a ticket, or nothing is moved
     return jobs;
 }
 
@@ -263,6 +266,7 @@ class WriteFaults : public testing::TestWithParam<const char*> {
     // An unsigned image keeps its only blob.
     static std::optional<std::string> afterwards(const Subject& subject, const Job& job) {
         if (!job.after && subject.name == "unsigned image") return subject.contentsWith(job.before);
+        if (subject.afterWith) return subject.afterWith(job.after);
         auto contents = subject.contentsWith(job.after);
         if (!job.after && !subject.isImage && contents) *contents += terminator();
         return contents;
@@ -278,10 +282,10 @@ class WriteFaults : public testing::TestWithParam<const char*> {
         EXPECT_FALSE(clones()) << "neither the old file nor the new one";
         ASSERT_TRUE(now.has_value());
         EXPECT_TRUE(now->starts_with(subject.data));
-        if (subject.isImage) {
-            const auto copies = pathsIn(temporary_, ".dmgData");
+        if (subject.isImage || subject.afterWith) {
+            const auto copies = pathsIn(temporary_, subject.isImage ? ".dmgData" : ".pkgTrailers");
             ASSERT_EQ(copies.size(), 1U);
-            const ProcessResult restored = runProcess({.executable = RESTORE_IMAGE,
+            const ProcessResult restored = runProcess({.executable = RESTORE_ARTEFACT,
                                                        .arguments = {subject.file, copies.front()},
                                                        .environment = {{"PATH", "/usr/bin:/bin"}}});
             EXPECT_EQ(restored.exitStatus, 0) << restored.errors;
@@ -346,6 +350,26 @@ TEST_P(WriteFaults, LoseNoUnsignedImage) {
 
 TEST_P(WriteFaults, LoseNoPackage) {
     run([](const std::string& place) { return fileIn(place, signedPackage(sampleData()), "package", {}); });
+}
+
+// Those behind the old ticket are moved in front of the new one.
+TEST_P(WriteFaults, LoseNoTrailersOfAPackage) {
+    run([](const std::string& place) {
+        const std::string archive = signedPackage(sampleData()).contents;
+        const auto withChain = [archive](PackageBuilder chain) {
+            return archive + chain.archive({}).build();
+        };
+        Subject package = fileIn(place, signedPackage(sampleData()), "package with trailers", {});
+        package.contentsWith = [=](const std::optional<Data>& ticket) {
+            return withChain(
+                PackageBuilder().terminator().ticket(foundation::toString(*ticket)).unknown("KEPT"));
+        };
+        package.afterWith = [=](const std::optional<Data>& ticket) {
+            PackageBuilder chain = PackageBuilder().terminator().unknown("KEPT");
+            return withChain(ticket ? chain.ticket(foundation::toString(*ticket)) : chain);
+        };
+        return package;
+    });
 }
 
 INSTANTIATE_TEST_SUITE_P(OnVolumes, WriteFaults, testing::Values("tmpfs", "xfs"), [](const auto& volume) {

@@ -12,6 +12,7 @@ namespace {
 using foundation::toData;
 using test::MessageCapture;
 using test::PackageBuilder;
+using testing::Contains;
 using testing::ElementsAre;
 using testing::StartsWith;
 
@@ -20,6 +21,7 @@ class FlatPackageWriting : public test::FlatPackageTest {
     FlatPackageWriting() {
         newTicket("NEW TICKET");
         platform.files.answerCloning(false);
+        platform.files.answerTemporaryDirectory(foundation::URL::fileURLWithPath(temporary.path()));
     }
 
     void newTicket(std::string_view bytes) { test::writeFile(source.path(), bytes); }
@@ -32,6 +34,7 @@ class FlatPackageWriting : public test::FlatPackageTest {
     }
 
     const foundation::URL source = platform.directory.url("new.ticket");
+    const test::TemporaryDirectory temporary;
 };
 
 TEST_F(FlatPackageWriting, TheFirstStapleAppendsTerminatorTicketAndRecord) {
@@ -243,8 +246,7 @@ TEST_F(FlatPackageWriting, AFirstStapleThatFailsAtAnyOperationEndsWith73OrSuccee
         }
         if (succeeded) {
             EXPECT_EQ(contents(), PackageBuilder().terminator().ticket("NEW TICKET").build());
-            EXPECT_EQ(n, 10U)
-                << "seekToEnd, reserve, seek, write, write, position, seek, write, synchronize, close";
+            EXPECT_EQ(n, 9U) << "seekToEnd, reserve, seek, write, position, seek, write, synchronize, close";
         } else {
             EXPECT_EQ(file.appropriateExitCode(), 73) << n;
             EXPECT_THAT(lastLine, StartsWith("Fatal error while writing new ticket to ")) << n;
@@ -252,8 +254,8 @@ TEST_F(FlatPackageWriting, AFirstStapleThatFailsAtAnyOperationEndsWith73OrSuccee
     }
 }
 
-// A chain that has trailers but no ticket is written over from the file's first byte on. Whatever operation is the
-// last one to work, what is left behind must not look like one.
+// A chain that has trailers but no ticket is written over from the file's first byte on. Whatever operation
+// is the last one to work, what is left behind must not look like one.
 TEST_F(FlatPackageWriting, CutShortAnywhereLeavesAFileThatCanBeStapledAgain) {
     const PackageBuilder unstapled;
     const PackageBuilder followed = PackageBuilder().terminator().ticket("AN OLD TICKET").unknown("unknown");
@@ -278,6 +280,49 @@ TEST_F(FlatPackageWriting, CutShortAnywhereLeavesAFileThatCanBeStapledAgain) {
             EXPECT_EQ(PWHashedFlatPackage(url, platform.services()).ticketData(), toData("NEW TICKET")) << n;
         }
     }
+}
+
+TEST_F(FlatPackageWriting, TrailersThatMoveAreSavedUntilTheyAreWritten) {
+    const PackageBuilder before = PackageBuilder().terminator().ticket("OLD").unknown("one");
+    put(before);
+    package.ticketData();
+    platform.files.fail("handle.write", EIO);
+    const MessageCapture output(kVerbosityVerbose);
+    EXPECT_FALSE(staple());
+
+    const std::size_t belongsAt = PackageBuilder().archiveSize();
+    std::vector<std::string> copies;
+    for (const auto& entry : std::filesystem::directory_iterator(temporary.path()))
+        copies.push_back(entry.path());
+    ASSERT_EQ(copies.size(), 1U);
+    EXPECT_TRUE(copies.front().ends_with("." + std::to_string(belongsAt) + ".pkgTrailers"));
+    EXPECT_EQ(test::readFile(copies.front()),
+              PackageBuilder().archive({}).terminator().unknown("one").ticket("NEW TICKET").build());
+    EXPECT_THAT(output.lines(), Contains("The trailers of Sample.pkg are kept in " + copies.front() + "."));
+}
+
+TEST_F(FlatPackageWriting, TheSavedTrailersAreGoneWhenAllIsWritten) {
+    put(PackageBuilder().terminator().ticket("OLD").unknown("one"));
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(platform.files.count("writeFile"), 1U);
+    EXPECT_TRUE(std::filesystem::is_empty(temporary.path()));
+}
+
+TEST_F(FlatPackageWriting, NothingIsSavedWhereNoTrailerMoves) {
+    put(PackageBuilder().terminator().unknown("one").ticket("OLD"));
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(platform.files.count("writeFile"), 0U);
+}
+
+TEST_F(FlatPackageWriting, TrailersThatCannotBeSavedAreNotMoved) {
+    const std::string before = PackageBuilder().terminator().ticket("OLD").unknown("one").build();
+    put(before);
+    platform.files.fail("writeFile", ENOSPC);
+    const MessageCapture output(kVerbosityVerbose);
+    EXPECT_FALSE(staple());
+    EXPECT_EQ(contents(), before);
+    EXPECT_EQ(package.appropriateExitCode(), 73);
+    EXPECT_THAT(output.lines().back(), StartsWith("Fatal error while writing new ticket to " + path + ". "));
 }
 
 TEST_F(FlatPackageWriting, DeletingRemovesTheTicketAndLeavesTheTerminator) {
