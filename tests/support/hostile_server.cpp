@@ -192,7 +192,9 @@ std::string Response::bytes() const {
 struct Script::Step {
     enum class Kind {
         sendPlain,
+        readPlainHead,
         handshake,
+        partOfHandshake,
         readRequest,
         readHead,
         send,
@@ -219,8 +221,17 @@ Script& Script::add(Step step) {
 Script& Script::sendPlain(std::string bytes) {
     return add({Kind::sendPlain, std::move(bytes)});
 }
+Script& Script::readPlainHead() {
+    return add({Kind::readPlainHead});
+}
+Script& Script::acceptTunnel() {
+    return readPlainHead().sendPlain("HTTP/1.1 200 Connection established\r\n\r\n");
+}
 Script& Script::handshake() {
     return add({Kind::handshake});
+}
+Script& Script::partOfHandshake() {
+    return add({Kind::partOfHandshake});
 }
 Script& Script::readRequest() {
     return add({Kind::readRequest});
@@ -313,8 +324,12 @@ class ScriptRun {
         switch (step.kind) {
             case Kind::sendPlain:
                 return sendOnSocket(step.bytes);
+            case Kind::readPlainHead:
+                return readPlainHead();
             case Kind::handshake:
                 return ensureHandshake();
+            case Kind::partOfHandshake:
+                return partOfHandshake();
             case Kind::readRequest:
                 return readRequest(true, nullptr);
             case Kind::readHead:
@@ -360,6 +375,44 @@ class ScriptRun {
         const std::lock_guard lock(server_.mutex);
         server_.connections[index_] = std::move(record);
         return handshakeDone_;
+    }
+
+    // The handshake is made in memory, so that what goes over the wire can be less than all of it.
+    bool partOfHandshake() {
+        handshakeTried_ = true;
+        RecordedConnection record;
+        const ConnectionHandle connection(SSL_new(server_.context.get()));
+        SSL_set_app_data(connection.get(), &record);
+        BIO* const in = BIO_new(BIO_s_mem());
+        BIO* const out = BIO_new(BIO_s_mem());
+        SSL_set_bio(connection.get(), in, out);  // which owns them from here on
+        while (BIO_pending(out) == 0) {
+            std::array<char, 16384> chunk{};
+            const ssize_t count = ::recv(socket_.get(), chunk.data(), chunk.size(), 0);
+            if (count <= 0) return false;
+            BIO_write(in, chunk.data(), static_cast<int>(count));
+            const int result = SSL_accept(connection.get());
+            if (SSL_get_error(connection.get(), result) != SSL_ERROR_WANT_READ) return fail();
+        }
+        std::string flight(BIO_ctrl_pending(out), '\0');
+        BIO_read(out, flight.data(), static_cast<int>(flight.size()));
+        flight.pop_back();
+        return sendOnSocket(flight);
+    }
+
+    // Byte by byte: what stands behind the head is not this step's.
+    bool readPlainHead() {
+        std::string head;
+        while (!head.ends_with("\r\n\r\n")) {
+            char next = 0;
+            if (head.size() > kMaximumHead || ::recv(socket_.get(), &next, 1, 0) != 1) return false;
+            head += next;
+        }
+        head.resize(head.size() - 2);
+        const std::lock_guard lock(server_.mutex);
+        server_.requests.push_back(parseHead(head));
+        server_.changed.notify_all();
+        return true;
     }
 
     bool sendOnSocket(std::string_view bytes) {

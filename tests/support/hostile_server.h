@@ -92,8 +92,16 @@ class Script {
   public:
     // On the bare connection, before the handshake.
     Script& sendPlain(std::string bytes);  // what is sent instead of TLS
+    /// Reads up to the end of a request's head, as a proxy gets it; the request is recorded without a body.
+    Script& readPlainHead();
+    /// What a proxy does that lets the client through: reads its CONNECT and agrees. The server that the
+    /// client then talks to is this one, whatever host was asked for.
+    Script& acceptTunnel();
 
     Script& handshake();
+    /// Answers the client's hello with all that a server has to say in a handshake but its last byte. No step
+    /// that needs the handshake may follow.
+    Script& partOfHandshake();
 
     /// Reads one request, head and body, and records it. Answers "Expect: 100-continue" with nothing.
     Script& readRequest();

@@ -184,12 +184,38 @@ TEST_F(HostileAnswer, StallsBeforeTheHandshake) {
     expectTimeout(Script().waitFor(gate));
 }
 
+TEST_F(HostileAnswer, StallsWithinTheHandshake) {
+    expectTimeout(Script().partOfHandshake().waitFor(gate));
+}
+
+TEST_F(HostileAnswer, StallsWithinItsFirstRecord) {
+    expectTimeout(Script().sendPlain("\x16\x03\x03").waitFor(gate));
+}
+
 TEST_F(HostileAnswer, StallsAfterTheHandshake) {
     expectTimeout(Script().handshake().waitFor(gate));
 }
 
 TEST_F(HostileAnswer, StallsWithinTheHeader) {
     expectTimeout(Script().readRequest().send("HTTP/1.1 200 OK\r\nX-A: b\r\n").waitFor(gate));
+}
+
+TEST_F(HostileAnswer, StallsAfterTheRequest) {
+    expectTimeout(Script().readRequest().waitFor(gate));
+}
+
+TEST_F(HostileAnswer, StallsWithinAChunk) {
+    expectTimeout(Script()
+                      .readRequest()
+                      .send("HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n9\r\nhal")
+                      .waitFor(gate));
+}
+
+TEST_F(HostileAnswer, StallsBeforeTheLastChunk) {
+    expectTimeout(Script()
+                      .readRequest()
+                      .send("HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n4\r\nbody\r\n")
+                      .waitFor(gate));
 }
 
 TEST_F(HostileAnswer, StallsBeforeTheBody) {

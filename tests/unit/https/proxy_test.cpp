@@ -88,6 +88,18 @@ TEST_F(Proxy, ThatCannotBeFoundIsAProxyFailure) {
     expectFailure(fetch("https://lumora.example/"), URLErrorCode::proxyFailed, "proxy");
 }
 
+TEST_F(Proxy, ThatDoesNotAnswerIsGivenUp) {
+    for (const char* said : {"", "HTTP/1.1 2", "HTTP/1.1 200 Connection established\r\nX-A: b\r\n",
+                             "HTTP/1.1 407 Password\r\nContent-Length: 9\r\n\r\nhal"}) {
+        Gate gate;
+        server.enqueue(Script().readPlainHead().sendPlain(said).waitFor(gate));
+        const Variable variable("https_proxy", "http://127.0.0.1:" + std::to_string(server.port()));
+        auto outcome = start(get("https://lumora.example/"));
+        ASSERT_TRUE(gate.waitUntilReached());
+        expectFailure(outlast(std::move(outcome)), URLErrorCode::timedOut, "no answer for 60 seconds");
+    }
+}
+
 TEST_F(Proxy, ReachedByHTTPSIsRefusedBeforeAnythingIsSent) {
     const Variable variable("https_proxy", "https://127.0.0.1:" + std::to_string(server.port()));
     expectFailure(fetch("https://lumora.example/"), URLErrorCode::proxyFailed,
