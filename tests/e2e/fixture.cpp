@@ -1,6 +1,7 @@
 #include "fixture.h"
 
 #include <algorithm>
+#include <csignal>
 #include <filesystem>
 #include <ostream>
 
@@ -11,6 +12,7 @@ namespace pinwell::test {
 using testing::AllOf;
 using testing::ElementsAreArray;
 using testing::Field;
+using testing::HasSubstr;
 using testing::IsEmpty;
 using testing::Matcher;
 using testing::Optional;
@@ -91,6 +93,24 @@ Matcher<const ProcessResult&> EndToEndTest::FailedOnTheWay(
     lines.emplace_back("Lumora's response is inconsistent with expections: (null)");
     lines.emplace_back(stapleFailed(68));
     return Ended(68, ElementsAreArray(lines));
+}
+
+void EndToEndTest::expectParked(const Matcher<std::string>& line) const {
+    RunningProcess run(command({"staple", bundle}));
+    const auto said = run.waitForLine("Large ticket for ");
+    ASSERT_TRUE(said.has_value()) << run.resultSoFar().output << run.resultSoFar().errors;
+    EXPECT_THAT(*said, line);
+    EXPECT_TRUE(run.isRunning());
+    run.sendSignal(SIGTERM);
+    const ProcessResult result = run.wait();
+    EXPECT_EQ(result.signal, SIGTERM);
+    EXPECT_EQ(result.errors, "");
+    EXPECT_EQ(result.outputLines().back(), *said);
+    EXPECT_EQ(stapled(), std::nullopt);
+}
+
+Matcher<std::string> EndToEndTest::DownloadFailed(const std::string& reason) const {
+    return AllOf(StartsWith("Large ticket for " + bundle + " failed to download. "), HasSubstr(reason));
 }
 
 void EndToEndTest::trust(const IssuedCertificate& certificate, const std::string& store) {

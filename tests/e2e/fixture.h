@@ -62,6 +62,9 @@ class EndToEndTest : public testing::Test {
     ProcessResult staple() const { return pinwell({"staple", bundle}); }
     ProcessResult validate() const { return pinwell({"validate", bundle}); }
 
+    /// A run whose download fails says so with this line, and then does nothing more, for ever.
+    void expectParked(const testing::Matcher<std::string>& line) const;
+
     // What it always says.
 
     std::string processing() const { return "Processing: " + bundle; }
@@ -81,6 +84,9 @@ class EndToEndTest : public testing::Test {
     testing::Matcher<const ProcessResult&> FailedOnTheWay(
         int code, std::vector<testing::Matcher<std::string>> linesBefore = {}) const;
 
+    /// The line of a download that failed.
+    testing::Matcher<std::string> DownloadFailed(const std::string& reason = {}) const;
+
     // The platform directory.
 
     /// Adds a certificate, by default to the maker's own roots.
@@ -98,7 +104,8 @@ class EndToEndTest : public testing::Test {
                                 HostileServerOptions options = {});
     /// Every request is answered so.
     void serve(Response response);
-    /// Nothing but refusals from now on; the server's threads are done with what the handler before refers to.
+    /// Nothing but refusals from now on; the server's threads are done with what the handler before refers
+    /// to.
     void serveNoMore() { serve({.status = 503}); }
     void serveTicket(const Data& ticket) { serve(answer(inlineRecord(ticket))); }
     /// The lookup is answered with this record; what comes after it, with `asset`.

@@ -10,7 +10,6 @@ namespace {
 using testing::AllOf;
 using testing::Contains;
 using testing::ElementsAre;
-using testing::HasSubstr;
 using testing::IsEmpty;
 using testing::Matcher;
 using testing::StartsWith;
@@ -19,23 +18,6 @@ constexpr const char* kWorked = "The staple and validate action worked!";
 
 class LargeTicket : public EndToEndTest {
   protected:
-    /// A run whose download fails says so and then does nothing more, for ever.
-    void expectParked(const Matcher<std::string>& line) const {
-        RunningProcess run(command({"staple", bundle}));
-        const auto said = run.waitForLine("Large ticket for ");
-        ASSERT_TRUE(said.has_value()) << run.resultSoFar().output << run.resultSoFar().errors;
-        EXPECT_THAT(*said, line);
-        EXPECT_TRUE(run.isRunning());
-        run.sendSignal(SIGTERM);
-        const ProcessResult result = run.wait();
-        EXPECT_EQ(result.signal, SIGTERM);
-        EXPECT_EQ(result.errors, "");
-        EXPECT_EQ(result.outputLines().back(), *said);
-        EXPECT_EQ(stapled(), std::nullopt);
-    }
-    Matcher<std::string> DownloadFailed(const std::string& reason = {}) const {
-        return AllOf(StartsWith("Large ticket for " + bundle + " failed to download. "), HasSubstr(reason));
-    }
     Matcher<const ProcessResult&> Worked() const {
         return Ended(0, ElementsAre(processing(), processing(), kWorked));
     }
