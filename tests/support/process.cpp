@@ -12,6 +12,7 @@
 #include <cerrno>
 #include <csignal>
 #include <cstdlib>
+#include <functional>
 #include <system_error>
 
 #include "foundation/file_io.h"
@@ -152,6 +153,7 @@ struct RunningProcess::State {
     void start(const Command& command);
     bool drain(FileDescriptor& from, std::string& into);
     bool step(Clock::time_point deadline);
+    std::optional<std::string> waitForLine(const std::function<bool(std::string_view)>& isWanted);
     void reap();
     void send(int number) const;
     void kill();
@@ -209,6 +211,18 @@ bool RunningProcess::State::step(Clock::time_point deadline) {
     return !ended;
 }
 
+std::optional<std::string> RunningProcess::State::waitForLine(
+    const std::function<bool(std::string_view)>& isWanted) {
+    const auto deadline = Clock::now() + kProcessPatience;
+    while (true) {
+        const std::string_view whole =
+            std::string_view(result.output).substr(0, result.output.rfind('\n') + 1);
+        for (const std::string& line : linesOf(whole))
+            if (isWanted(line)) return line;
+        if (!step(deadline)) return std::nullopt;
+    }
+}
+
 void RunningProcess::State::reap() {
     int status = 0;
     while (::waitpid(id, &status, 0) < 0 && errno == EINTR) {
@@ -236,14 +250,12 @@ RunningProcess::~RunningProcess() {
 }
 
 std::optional<std::string> RunningProcess::waitForLine(std::string_view prefix) {
-    const auto deadline = Clock::now() + kProcessPatience;
-    while (true) {
-        const std::string& output = state_->result.output;
-        const std::string_view whole = std::string_view(output).substr(0, output.rfind('\n') + 1);
-        for (const std::string& line : linesOf(whole))
-            if (line.starts_with(prefix)) return line;
-        if (!state_->step(deadline)) return std::nullopt;
-    }
+    return state_->waitForLine([prefix](std::string_view line) { return line.starts_with(prefix); });
+}
+
+std::optional<std::string> RunningProcess::waitForLineWith(std::string_view part) {
+    return state_->waitForLine(
+        [part](std::string_view line) { return line.find(part) != std::string_view::npos; });
 }
 
 bool RunningProcess::isRunning() {

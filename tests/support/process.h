@@ -71,6 +71,9 @@ class RunningProcess {
     /// nothing when the child ends or patience does without it.
     std::optional<std::string> waitForLine(std::string_view prefix);
 
+    /// The same for a line that holds `part` anywhere, as logs have it behind a time.
+    std::optional<std::string> waitForLineWith(std::string_view part);
+
     bool isRunning();
 
     /// Its process number, good for as long as the child has not been waited for.
