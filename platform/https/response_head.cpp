@@ -30,12 +30,13 @@ bool ResponseHead::addLine(std::string_view line) {
     bytes_ += line.size();
     if (bytes_ > maximumBytes_) return false;
     if (complete_) return ++fields_ <= maximumFields_;
-    if (line.starts_with("HTTP/")) {
+    if (isAtStart_ && line.starts_with("HTTP/")) {
         startResponse(line);
         return true;
     }
     if (trimmed(line).empty()) {
         complete_ = status_ >= 200;
+        isAtStart_ = true;
         return true;
     }
     addField(line);
@@ -53,6 +54,8 @@ bool ResponseHead::hasPlainFraming() const {
 
 // "HTTP/1.1 200 OK", "HTTP/2 200"
 void ResponseHead::startResponse(std::string_view statusLine) {
+    isAtStart_ = false;
+    isHTTP1_ = statusLine.starts_with("HTTP/1.");
     headers_.clear();
     lastName_.clear();
     status_ = 0;

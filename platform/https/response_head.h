@@ -5,9 +5,10 @@
 
 namespace pinwell::https {
 
-/// Interim responses (1xx, and what a retry leaves behind) are forgotten when the next status line comes;
-/// fields behind the body (trailers) are counted and dropped. Fields of one name are joined with ", " in
-/// their order (RFC 9110, section 5.3).
+/// Interim responses (1xx) are forgotten when the next status line comes, which is the first line of a head
+/// and no other. Fields behind the body (trailers) are counted and dropped. Fields of one name are joined
+/// with
+/// ", " in their order (RFC 9110, section 5.3).
 class ResponseHead {
   public:
     ResponseHead(std::size_t maximumBytes, std::size_t maximumFields)
@@ -18,6 +19,10 @@ class ResponseHead {
 
     /// The empty line of a final response was seen.
     bool isComplete() const noexcept { return complete_; }
+
+    /// Whether the status line is of an HTTP/1 version. Of HTTP/2 is the one that the transfer library makes
+    /// up where that is spoken, and any that a server sends of its own accord.
+    bool isHTTP1() const noexcept { return isHTTP1_; }
 
     /// Whether it says in one way only where the body ends (RFC 9112, section 6.3): with lengths that are all
     /// the same number, with the chunked coding alone, or not at all.
@@ -35,6 +40,8 @@ class ResponseHead {
     std::size_t bytes_ = 0;
     std::size_t fields_ = 0;
     bool complete_ = false;
+    bool isAtStart_ = true;  // of the first head, or of the one behind an interim response
+    bool isHTTP1_ = false;
     int status_ = 0;
     Headers headers_;
     std::string lastName_;

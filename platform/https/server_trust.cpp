@@ -48,6 +48,16 @@ std::optional<std::vector<Data>> peerCertificates(const X509_STORE_CTX* context)
     return list;
 }
 
+// Settled before the certificates come, in each version of the handshake.
+bool hasAgreedOnHTTP2(X509_STORE_CTX* context) {
+    const auto* const connection =
+        static_cast<SSL*>(X509_STORE_CTX_get_ex_data(context, SSL_get_ex_data_X509_STORE_CTX_idx()));
+    const unsigned char* name = nullptr;
+    unsigned int length = 0;
+    SSL_get0_alpn_selected(connection, &name, &length);
+    return length == 2 && name[0] == 'h' && name[1] == '2';
+}
+
 int verifyThunk(X509_STORE_CTX* context, void* self) {
     return static_cast<ServerTrust*>(self)->verify(context) ? 1 : 0;
 }
@@ -77,6 +87,7 @@ bool ServerTrust::install(void* context) noexcept {
 
 bool ServerTrust::verify(void* storeContext) noexcept {
     auto* const context = static_cast<X509_STORE_CTX*>(storeContext);
+    agreedOnHTTP2_ = hasAgreedOnHTTP2(context);
     bool trusted = false;
     try {
         if (const auto certificates = peerCertificates(context)) trusted = judge_(*certificates);

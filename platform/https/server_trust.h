@@ -37,6 +37,9 @@ class ServerTrust {
     bool sawOrderlyEnd() const noexcept { return sawOrderlyEnd_; }
     void noteOrderlyEnd() noexcept { sawOrderlyEnd_ = true; }
 
+    /// The last handshake agreed on HTTP/2 (ALPN, RFC 7301).
+    bool agreedOnHTTP2() const noexcept { return agreedOnHTTP2_; }
+
     /// What the TLS library calls; the context is an X509_STORE_CTX.
     bool verify(void* storeContext) noexcept;
 
@@ -45,6 +48,7 @@ class ServerTrust {
     bool asked_ = false;
     bool refused_ = false;
     bool sawOrderlyEnd_ = false;
+    bool agreedOnHTTP2_ = false;
 };
 
 }  // namespace pinwell::https

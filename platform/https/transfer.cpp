@@ -270,9 +270,7 @@ class Exchange {
     // Whether nothing but the end of the connection tells where the body ends (RFC 9112, section 6.3). The
     // library takes any end for one, so that whoever can cut a connection could shorten such a body.
     bool endsWithConnection() const {
-        long version = 0;
-        curl_easy_getinfo(easy_.get(), CURLINFO_HTTP_VERSION, &version);
-        if (version != CURL_HTTP_VERSION_1_0 && version != CURL_HTTP_VERSION_1_1) return false;
+        if (serverTrust_.agreedOnHTTP2()) return false;
         if (request_.method == "HEAD" || head_.status() == 204 || head_.status() == 304) return false;
         return !head_.headers().contains("Transfer-Encoding") && !head_.headers().contains("Content-Length");
     }
@@ -344,11 +342,16 @@ class Exchange {
             fail(URLErrorCode::tooLarge, "the answer's header is larger than allowed");
             return false;
         }
-        // The library takes the last of several lengths, the digits that a malformed one begins with, and
-        // unpacks a transfer whose compression nobody asked for, however much that makes of it.
-        if (!head_.isComplete() || head_.hasPlainFraming()) return true;
-        fail(URLErrorCode::badServerResponse, "where the answer ends is not said in one plain way");
-        return false;
+        if (!head_.isComplete()) return true;
+        // The library believes a status line that speaks of HTTP/2 whatever was agreed on, and reads a body
+        // by other rules then.
+        if (head_.isHTTP1() == serverTrust_.agreedOnHTTP2())
+            fail(URLErrorCode::badServerResponse, "the answer is not of the HTTP version agreed on");
+        // It takes the last of several lengths, the digits that a malformed one begins with, and unpacks a
+        // transfer whose compression nobody asked for, however much that makes of it.
+        if (!head_.hasPlainFraming())
+            fail(URLErrorCode::badServerResponse, "where the answer ends is not said in one plain way");
+        return !failure_;
     }
 
     static std::size_t onBody(char* bytes, std::size_t, std::size_t count, void* self) noexcept {

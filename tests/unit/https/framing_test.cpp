@@ -59,6 +59,11 @@ TEST_F(Framing, ChunksGoBeforeAContentLength) {
         "body");
 }
 
+std::string gzipOfBody() {
+    using namespace std::string_literals;
+    return "\x1f\x8b\x08\0\0\0\0\0\0\x03\x4b\xca\x4f\xa9\x04\0\xb2\x0b\xa8\xdb\x04\0\0\0"s;
+}
+
 // A compressed transfer was not asked for; unpacked, a few bytes could become very many.
 TEST_F(Framing, TransferCodingsOtherThanChunkedAreRefused) {
     for (const char* coding : {"gzip, chunked", "chunked, gzip", "deflate", "identity", "br", "x-gzip",
@@ -69,11 +74,7 @@ TEST_F(Framing, TransferCodingsOtherThanChunkedAreRefused) {
 }
 
 TEST_F(Framing, ACompressedTransferIsNotUnpacked) {
-    using namespace std::string_literals;
-    expectRefused(
-        fetchAnswer("Transfer-Encoding: gzip\r\n",
-                    "\x1f\x8b\x08\0\0\0\0\0\0\x03\x4b\xca\x4f\xa9\x04\0\xb2\x0b\xa8\xdb\x04\0\0\0"s),
-        "gzip of \"body\"");
+    expectRefused(fetchAnswer("Transfer-Encoding: gzip\r\n", gzipOfBody()), "gzip of \"body\"");
 }
 
 TEST_F(Framing, TransferCodingsInTwoFieldsAreRefused) {
@@ -147,6 +148,24 @@ TEST_F(Framing, AStatusLineThatIsNoneIsRefused) {
             fetchFrom(
                 Script().readRequest().send(std::string(line) + "\r\nContent-Length: 4\r\n\r\nbody").close()),
             line);
+}
+
+TEST_F(Framing, AVersionThatWasNotAgreedOnIsRefused) {
+    for (const char* version : {"HTTP/2", "HTTP/2.0", "HTTP/3"}) {
+        const std::string head = std::string(version) + " 200 OK\r\n";
+        expectRefused(fetchFrom(Script().readRequest().send(head + "\r\nbo").cut()), version);
+        expectRefused(fetchFrom(Script().readRequest().send(head + "Content-Length: 4\r\n\r\nbody").close()),
+                      version);
+    }
+}
+
+TEST_F(Framing, AFieldThatLooksLikeAStatusLineHidesNothing) {
+    const std::string_view disguise = "HTTP/1.1 200 OK: yes\r\n";
+    expectRefused(fetchAnswer("Transfer-Encoding: gzip\r\n" + std::string(disguise), gzipOfBody()), "gzip");
+    expectRefused(fetchAnswer("Content-Length: 9\r\nContent-Length: 4\r\n" + std::string(disguise), "body"),
+                  "lengths");
+    const Outcome outcome = fetchAnswer("X-A: b\r\n" + std::string(disguise), "body");
+    EXPECT_EQ(outcome.response->header("X-A"), "b");
 }
 
 TEST_F(Framing, AProtocolThatNobodyAskedToSwitchToIsNoAnswer) {

@@ -84,6 +84,12 @@ TEST_F(ResponseHead, PassesOverALineThatIsNoField) {
     EXPECT_TRUE(head.headers().empty());
 }
 
+TEST_F(ResponseHead, BeginsWithItsOneStatusLine) {
+    EXPECT_TRUE(add({"HTTP/1.1 200 OK\r\n", "A: 1\r\n", "HTTP/1.1 404: B\r\n", "\r\n"}));
+    EXPECT_EQ(head.status(), 200);
+    EXPECT_EQ(head.headers(), (https::Headers{{"A", "1"}, {"HTTP/1.1 404", "B"}}));
+}
+
 TEST_F(ResponseHead, HasNoStatusWithoutANumber) {
     EXPECT_TRUE(add({"HTTP/1.1 x\r\n", "\r\n"}));
     EXPECT_EQ(head.status(), 0);
