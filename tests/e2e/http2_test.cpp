@@ -68,8 +68,9 @@ class HTTP2 : public EndToEndTest {
         trust(serverChain.root);
         return startService(identityOf(serverChain), "127.0.0.1", {.applicationProtocol = "h2"});
     }
-    /// What the client says first, connection preface and all, ends in an empty line.
-    static Script afterThePreface() { return Script().readHead(); }
+    /// The connection preface looks like a head of HTTP/1, and the request's body is what the request ends
+    /// with: nothing can be said about a stream before its request has come.
+    static Script afterTheRequest() { return Script().readHead().readUntil("}]}"); }
     void expectUntouched() const {
         EXPECT_EQ(stapled(), std::nullopt);
         EXPECT_THAT(temporaryFiles(), IsEmpty());
@@ -79,7 +80,7 @@ class HTTP2 : public EndToEndTest {
 TEST_F(HTTP2, IsSpoken) {
     const std::string body = inlineRecord(ticket());
     ASSERT_LT(body.size(), 16384U);
-    http2Service().enqueue(afterThePreface().send(
+    http2Service().enqueue(afterTheRequest().send(
         settings() + head(kStatus200 + field("x-ostrel-request-uuid", "TWO")) + lastData(body)));
     EXPECT_THAT(staple(),
                 Ended(0, ElementsAre(processing(), processing(), "The staple and validate action worked!")));
@@ -95,7 +96,7 @@ struct Broken {
 class BrokenHTTP2 : public HTTP2, public testing::WithParamInterface<Broken> {};
 
 TEST_P(BrokenHTTP2, IsNoAnswer) {
-    http2Service().enqueue(afterThePreface().send(GetParam().frames).close());
+    http2Service().enqueue(afterTheRequest().send(GetParam().frames).close());
     EXPECT_THAT(staple(), FailedOnTheWay(kAnyCode));
     expectUntouched();
 }
@@ -135,7 +136,7 @@ INSTANTIATE_TEST_SUITE_P(
 
 TEST_F(HTTP2, ABlockThatGrowsWhenUnpackedIsRefused) {
     // One field of 3000 bytes, and then its place in the dynamic table again and again.
-    http2Service().enqueue(afterThePreface()
+    http2Service().enqueue(afterTheRequest()
                                .send(settings() + head(kStatus200 + field("x-a", std::string(3000, 'a')) +
                                                        std::string(10000, '\xbe')))
                                .drain());
@@ -147,7 +148,7 @@ TEST_F(HTTP2, PaddingBeyondItsFrameIsNoAnswer) {
     // The transfer library gives up the connection and hands out what has come before.
     for (const std::string& before : {std::string(), frame(kDataFrame, 0, kOurStream, "{\"records\":")}) {
         http2Service().enqueue(
-            afterThePreface().send(settings() + head(kStatus200) + before +
+            afterTheRequest().send(settings() + head(kStatus200) + before +
                                    frame(kDataFrame, kPadded | kEndStream, kOurStream, "\xff[]}")));
         EXPECT_THAT(staple().exitStatus, testing::Optional(testing::AnyOf(65, 68)));
         expectUntouched();
@@ -157,7 +158,7 @@ TEST_F(HTTP2, PaddingBeyondItsFrameIsNoAnswer) {
 TEST_F(HTTP2, ABodyWithoutEndIsRefused) {
     const std::string data = frame(kDataFrame, 0, kOurStream, std::string(16384, ' '));
     // The client gives out room for more as it reads; this server does not wait for it.
-    http2Service().enqueue(afterThePreface().send(settings() + head(kStatus200)).sendEndlessly(data));
+    http2Service().enqueue(afterTheRequest().send(settings() + head(kStatus200)).sendEndlessly(data));
     EXPECT_THAT(staple(), FailedOnTheWay(kAnyCode));
     expectUntouched();
 }
@@ -170,7 +171,7 @@ TEST_F(HTTP2, FramesWithoutEndAreNoAnswer) {
           std::pair(settings(), frame(0x42, 0, kOurStream, "unknown"))}) {
         std::string many;
         while (many.size() < std::size_t{4} << 20U) many += again;
-        http2Service().enqueue(afterThePreface().send(first).send(many).close());
+        http2Service().enqueue(afterTheRequest().send(first).send(many).close());
         EXPECT_THAT(staple(), FailedOnTheWay(kAnyCode));
         expectUntouched();
     }

@@ -197,6 +197,7 @@ struct Script::Step {
         partOfHandshake,
         readRequest,
         readHead,
+        readUntil,
         send,
         drip,
         sendEndlessly,
@@ -238,6 +239,9 @@ Script& Script::readRequest() {
 }
 Script& Script::readHead() {
     return add({Kind::readHead});
+}
+Script& Script::readUntil(std::string bytes) {
+    return add({Kind::readUntil, std::move(bytes)});
 }
 Script& Script::send(std::string bytes) {
     return add({Kind::send, std::move(bytes)});
@@ -334,6 +338,8 @@ class ScriptRun {
                 return readRequest(true, nullptr);
             case Kind::readHead:
                 return readRequest(false, nullptr);
+            case Kind::readUntil:
+                return readUntil(step.bytes);
             case Kind::send:
                 return sendSecurely(step.bytes);
             case Kind::drip:
@@ -470,6 +476,14 @@ class ScriptRun {
         const std::lock_guard lock(server_.mutex);
         server_.requests.push_back(std::move(request));
         server_.changed.notify_all();
+        return true;
+    }
+
+    bool readUntil(const std::string& bytes) {
+        std::size_t at = std::string::npos;
+        while ((at = received_.find(bytes)) == std::string::npos)
+            if (received_.size() > kMaximumHead || !receive()) return false;
+        received_.erase(0, at + bytes.size());
         return true;
     }
 

@@ -107,6 +107,8 @@ class Script {
     Script& readRequest();
     /// Reads up to the end of the request's head only; the request is recorded without a body.
     Script& readHead();
+    /// Reads up to the end of these bytes, 1 MiB at most, for what is not HTTP/1.
+    Script& readUntil(std::string bytes);
 
     /// Sends the bytes, as one TLS record where they fit.
     Script& send(std::string bytes);
