@@ -4,6 +4,7 @@
 #include <utility>
 
 #include "foundation/bytes.h"
+#include "src/PWHashedFile/blob_set.h"
 
 namespace pinwell::inspect {
 namespace {

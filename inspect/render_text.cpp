@@ -4,6 +4,7 @@
 #include <utility>
 
 #include "foundation/format.h"
+#include "src/PWHashedFile/blob_set.h"
 
 namespace pinwell::inspect {
 namespace {

@@ -2,10 +2,8 @@
 
 #include <sysexits.h>
 
-#include "codesign/superblob.h"
 #include "foundation/date.h"
 #include "foundation/format.h"
-#include "src/PWHashedFile/blob_set.h"
 #include "src/PWHashedFile/package_trailer.h"
 
 namespace pinwell::inspect {
@@ -57,27 +55,6 @@ std::string_view kindName(Kind kind) {
             break;
     }
     return "nothing that carries a ticket";
-}
-
-std::string_view slotName(std::uint32_t slot) {
-    switch (slot) {
-        case codesign::kSlotCodeDirectory:
-            return "code directory";
-        case codesign::kSlotRequirements:
-            return "requirements";
-        case codesign::kSlotEntitlements:
-            return "entitlements";
-        case codesign::kSlotDerEntitlements:
-            return "entitlements (DER)";
-        case codesign::kSlotCms:
-            return "signer's message";
-        case kTicketSlotType:
-            return "ticket";
-        default:
-            break;
-    }
-    const bool alternate = slot >= codesign::kSlotFirstAlternate && slot <= codesign::kSlotLastAlternate;
-    return alternate ? "alternate code directory" : "unknown";
 }
 
 std::string_view trailerTypeName(std::uint16_t type) {

@@ -188,8 +188,6 @@ int exitStatusOf(Outcome outcome);
 /// "SHA-256" and so on; "unnamed" for 0, "unknown" for others.
 std::string_view algorithmName(std::uint32_t algorithm);
 std::string_view kindName(Kind kind);
-/// What stands in a slot of a superblob.
-std::string_view slotName(std::uint32_t slot);
 std::string_view trailerTypeName(std::uint16_t type);
 /// "64-bit ARM", or the number in hexadecimal.
 std::string cpuTypeName(std::uint32_t cpuType);

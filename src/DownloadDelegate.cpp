@@ -2,9 +2,7 @@
 
 #include "src/DownloadDelegate.h"
 
-#include <algorithm>
 #include <limits>
-#include <span>
 
 #include "src/messages.h"
 #include "src/tm_ticket.h"
@@ -15,18 +13,6 @@ namespace {
 // Hands the error of the last step to a caller that wants it.
 void handOut(ErrorOut error, std::optional<Error> value) {
     if (error != nullptr) *error = std::move(value);
-}
-
-bool listsCDHash(const tm_ticket* ticket, const Data& wanted) {
-    const std::uint32_t count = tm_ticket_get_cdhash_count(ticket);
-    for (std::uint32_t index = 0; index < count; ++index) {
-        tm_cdhash entry{};
-        if (tm_ticket_copy_cdhash(ticket, index, &entry) != 0) continue;
-        // The size that the algorithm stands for decides, not the record's own length.
-        const auto hash = std::span(entry.hash).first(tm_cdhash_algorithm_get_size(entry.algorithm));
-        if (std::equal(hash.begin(), hash.end(), wanted.begin(), wanted.end())) return true;
-    }
-    return false;
 }
 
 }  // namespace
@@ -60,7 +46,7 @@ bool DownloadDelegate::isValidTicketData(const std::optional<Data>& data) {
         return false;
     }
     const auto wanted = hashedFile_->cdHash();
-    if (!wanted || !listsCDHash(ticket.get(), *wanted)) return false;
+    if (!wanted || !tm_ticket_lists_cdhash(ticket.get(), *wanted)) return false;
     hashedFile_->setAppropriateExitCode(kExitOK);
     return true;
 }

@@ -218,6 +218,16 @@ std::int32_t tm_ticket_copy_cdhash(const tm_ticket* ticket, std::uint64_t index,
     return copyEntry(entry, header.version, header.hashLength, cdhash);
 }
 
+bool tm_ticket_lists_cdhash(const tm_ticket* ticket, ByteView cdhash) {
+    const std::uint32_t count = tm_ticket_get_cdhash_count(ticket);
+    for (std::uint32_t index = 0; index < count; ++index) {
+        tm_cdhash entry{};
+        if (tm_ticket_copy_cdhash(ticket, index, &entry) != kAccepted) continue;
+        if (std::ranges::equal(ByteView(entry.hash).first(entry.length), cdhash)) return true;
+    }
+    return false;
+}
+
 std::uint64_t tm_ticket_survey::entry_size() const {
     return Header{.version = version, .hashLength = hash_length}.entrySize();
 }

@@ -109,6 +109,10 @@ std::uint32_t tm_ticket_get_cdhash_count(const tm_ticket* ticket);
 /// The entry at `index`. `cdhash` is written only on success.
 std::int32_t tm_ticket_copy_cdhash(const tm_ticket* ticket, std::uint64_t index, tm_cdhash* cdhash);
 
+/// Whether one of the entries is this hash: by its bytes, as many as the entry's algorithm has, whatever the
+/// algorithm's number. Entries that cannot be copied out are passed over.
+bool tm_ticket_lists_cdhash(const tm_ticket* ticket, foundation::ByteView cdhash);
+
 /// Bytes of a code-directory hash by its algorithm, numbered as in code directories (codesign::DigestType):
 /// 20 for 0 to 3, 48 for 4; 0 when unknown.
 std::size_t tm_cdhash_algorithm_get_size(std::uint32_t algorithm);

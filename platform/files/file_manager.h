@@ -10,9 +10,9 @@
 #include <functional>
 #include <memory>
 #include <optional>
-#include <stdexcept>
 #include <string>
 
+#include "files/file_reader.h"
 #include "foundation/error.h"
 #include "foundation/url.h"
 
@@ -72,28 +72,10 @@ struct ResourceProperties {
     Dictionary dictionary() const;
 };
 
-/// A file handle's failure. `what()` is the reason text: what was tried, on which file, and the system's word
-/// for why not.
-class FileHandleError : public std::runtime_error {
+/// An open regular file that can be written to as well; what is written past its end leaves a hole. The
+/// operations throw FileHandleError; the destructor closes, and swallows what goes wrong then.
+class FileHandle : public FileReader {
   public:
-    using std::runtime_error::runtime_error;
-};
-
-/// An open regular file. The operations throw FileHandleError; the destructor closes, and swallows what goes
-/// wrong then.
-class FileHandle {
-  public:
-    virtual ~FileHandle() = default;
-
-    /// Both answer the new position, in bytes from the start. A position past the end is one; what is written
-    /// there leaves a hole.
-    virtual std::uint64_t seekToEnd() = 0;
-    virtual std::uint64_t seek(std::uint64_t position) = 0;
-    virtual std::uint64_t position() = 0;
-
-    /// Up to `length` bytes; fewer only at the end of the file. Memory grows with what is really read.
-    virtual Data read(std::uint64_t length) = 0;
-
     /// Sees to it that the next `length` bytes from the position on will find room on the volume, where the
     /// file system can promise that; the file is as long as before. A volume that is full says so here, while
     /// nothing has been overwritten yet.

@@ -95,19 +95,10 @@ Result<void> writeAll(const OpenFile& file, ByteView bytes) {
 }
 
 Result<Data> readUpTo(const OpenFile& file, std::uint64_t length) {
-    Data data;
-    while (data.size() < length) {
-        const std::size_t had = data.size();
-        // Little at first: most files are small, and fresh memory costs more than another call.
-        const std::size_t piece = std::clamp(had, kFirstPieceSize, kPieceSize);
-        data.resize(had + static_cast<std::size_t>(std::min<std::uint64_t>(length - had, piece)));
-        const ssize_t count =
-            uninterrupted([&] { return ::read(file.number(), data.data() + had, data.size() - had); });
-        if (count < 0) return lastError(file.path);
-        data.resize(had + static_cast<std::size_t>(count));
-        if (count == 0) break;
-    }
-    return data;
+    auto data = readPieces(
+        length, [&](std::byte* into, std::size_t size) { return ::read(file.number(), into, size); });
+    if (!data) return lastError(file.path);
+    return *std::move(data);
 }
 
 Result<void> flush(int descriptor, const std::string& path) {

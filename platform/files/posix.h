@@ -4,6 +4,7 @@
 
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <optional>
 #include <string>
@@ -71,6 +72,24 @@ enum class LastLink { refused, followed };
 Result<FileDescriptor> openDirectory(const std::string& path, LastLink link);
 
 Result<void> writeAll(const OpenFile& file, ByteView bytes);
+
+/// Reads by `readPiece`(buffer, size), which answers as read(2) does, until `length` bytes are had or the
+/// file ends; nothing when a piece fails.
+template <class ReadPiece>
+std::optional<Data> readPieces(std::uint64_t length, ReadPiece readPiece) {
+    Data data;
+    while (data.size() < length) {
+        const std::size_t had = data.size();
+        // Little at first: most files are small, and fresh memory costs more than another call.
+        const std::size_t piece = std::clamp(had, kFirstPieceSize, kPieceSize);
+        data.resize(had + static_cast<std::size_t>(std::min<std::uint64_t>(length - had, piece)));
+        const ssize_t count = uninterrupted([&] { return readPiece(data.data() + had, data.size() - had); });
+        if (count < 0) return std::nullopt;
+        data.resize(had + static_cast<std::size_t>(count));
+        if (count == 0) break;
+    }
+    return data;
+}
 
 /// Reads from the current position until `length` bytes are had or the file ends.
 Result<Data> readUpTo(const OpenFile& file, std::uint64_t length);

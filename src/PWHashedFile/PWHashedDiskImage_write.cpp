@@ -39,7 +39,7 @@ bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& sou
         return fail();
     }
 
-    Data superblob = superblobWithTicket(blobs_, ticket);
+    Data superblob = superblobWithTicket(signature_.blobs, ticket);
     if (!superblob.empty() && !writeSignature(std::move(superblob), target, deleteExisting, held))
         return fail();
     setAppropriateExitCode(kExitOK);
@@ -48,9 +48,9 @@ bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& sou
 
 bool PWHashedDiskImage::writeSignature(Data superblob, const URL& target, bool deleteExisting,
                                        std::optional<Error>& held) {
-    dmgHeader_.setCodeSign(csStart_, superblob.size());
+    signature_.trailer.setCodeSign(signature_.csStart, superblob.size());
     Data signatureAndTrailer = std::move(superblob);
-    foundation::append(signatureAndTrailer, dmgHeader_.bytes());
+    foundation::append(signatureAndTrailer, signature_.trailer.bytes());
     saveDebugCopy(signatureAndTrailer, held);
 
     const std::string name = target.lastPathComponent();
@@ -86,11 +86,12 @@ void PWHashedDiskImage::saveDebugCopy(ByteView signatureAndTrailer, std::optiona
 void PWHashedDiskImage::writeAtEndOfData(files::FileHandle& file, ByteView signatureAndTrailer,
                                          const std::string& name) const {
     file.seek(endOfDMGData_);
-    if (origEOF_ < endOfDMGData_ + signatureAndTrailer.size()) file.reserve(signatureAndTrailer.size());
+    if (signature_.fileSize < endOfDMGData_ + signatureAndTrailer.size())
+        file.reserve(signatureAndTrailer.size());
     file.write(signatureAndTrailer);
     const std::uint64_t end = file.position();
-    if (origEOF_ > end) {
-        NoisyLog("Truncating %@ from to %llu bytes to %llu bytes.", name, origEOF_, end);
+    if (signature_.fileSize > end) {
+        NoisyLog("Truncating %@ from to %llu bytes to %llu bytes.", name, signature_.fileSize, end);
         file.truncate(end);
     }
     file.synchronize();

@@ -6,14 +6,9 @@
 #pragma once
 
 #include "src/PWHashedFile/PWHashedFile.h"
+#include "src/PWHashedFile/package_trailer_walk.h"
 
 namespace pinwell {
-
-/// Longest ticket that is read, in bytes. None comes near it, and a sparse file can claim any length.
-inline constexpr std::uint64_t kMaximumTicket = files::kMaximumWholeFile;
-
-/// Most that unknown trailers may come to together, in bytes: a million of them when they are all empty.
-inline constexpr std::uint64_t kMaximumUnknownTrailers = 16ULL * 1024 * 1024;
 
 /// What was found describes the file as it was when its trailers were read, which the first ticketData()
 /// does; nothing is read again after a write.
@@ -23,15 +18,15 @@ class PWHashedFlatPackage : public PWHashedFile {
     using PWHashedFile::PWHashedFile;
 
     /// Size of the file; offset and length of the ticket, both 0 when there is none.
-    std::uint64_t origEOL() const noexcept { return origEOL_; }
-    std::uint64_t ticketStart() const noexcept { return ticketStart_; }
-    std::uint64_t ticketLength() const noexcept { return ticketLength_; }
+    std::uint64_t origEOL() const noexcept { return trailers_.fileSize; }
+    std::uint64_t ticketStart() const noexcept { return trailers_.ticketStart; }
+    std::uint64_t ticketLength() const noexcept { return trailers_.ticketLength; }
 
     /// There is a terminator, or a trailer of unknown type.
-    bool hasTrailers() const noexcept { return hasTrailers_; }
+    bool hasTrailers() const noexcept { return trailers_.hasTrailers; }
 
     /// The unknown trailers behind the ticket, in file order; nothing when there are none.
-    const std::optional<Data>& dataToAppend() const noexcept { return dataToAppend_; }
+    const std::optional<Data>& dataToAppend() const noexcept { return trailers_.dataToAppend; }
 
     /// Walks the trailers from the last one to the first ticket or the terminator.
     std::optional<Data> _ticketData() override;
@@ -48,18 +43,11 @@ class PWHashedFlatPackage : public PWHashedFile {
 
   private:
     std::string name() const { return fileURL()->lastPathComponent(); }
-    bool readSize(files::FileHandle& file);
-    std::optional<Data> walkTrailers(files::FileHandle& file);
-    std::optional<Data> readTicket(files::FileHandle& file, std::uint64_t start, std::uint32_t length);
     Data tailWith(foundation::ByteView ticket) const;
     std::optional<URL> saveMovedTrailers(files::FileHandle& file, foundation::ByteView tail) const;
     void writeTail(files::FileHandle& file, foundation::ByteView tail, const std::string& targetName);
 
-    std::uint64_t origEOL_ = 0;
-    std::uint64_t ticketStart_ = 0;
-    std::uint64_t ticketLength_ = 0;
-    bool hasTrailers_ = false;
-    std::optional<Data> dataToAppend_;
+    package_trailers trailers_;  // but for the ticket itself, which is handed out
 };
 
 }  // namespace pinwell

@@ -62,7 +62,7 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
 }
 
 Data PWHashedFlatPackage::tailWith(ByteView ticket) const {
-    Data tail = dataToAppend_.value_or(Data{});
+    Data tail = trailers_.dataToAppend.value_or(Data{});
     if (ticket.empty()) return tail;
     const trailer_header record = ticketTrailer(static_cast<std::uint32_t>(ticket.size()));
     tail.insert(tail.end(), ticket.begin(), ticket.end());
@@ -73,8 +73,8 @@ Data PWHashedFlatPackage::tailWith(ByteView ticket) const {
 // Trailers of others can be had from nowhere else. When some are about to move, all that will be written is
 // saved until it has been written, behind the bytes that it belongs behind and with their offset in the name.
 std::optional<URL> PWHashedFlatPackage::saveMovedTrailers(files::FileHandle& file, ByteView tail) const {
-    if (!dataToAppend_ || ticketStart_ < kTrailerSize) return std::nullopt;
-    const std::uint64_t offset = ticketStart_ - kTrailerSize;
+    if (!trailers_.dataToAppend || trailers_.ticketStart < kTrailerSize) return std::nullopt;
+    const std::uint64_t offset = trailers_.ticketStart - kTrailerSize;
     file.seek(offset);
     Data saved = file.read(kTrailerSize);
     saved.insert(saved.end(), tail.begin(), tail.end());
@@ -92,24 +92,24 @@ std::optional<URL> PWHashedFlatPackage::saveMovedTrailers(files::FileHandle& fil
 // terminator, without which a ticket is found just as well, comes last; and trailers that stood behind the
 // old ticket are made unrecognisable, by zeros behind them, before the new ones are written over them.
 void PWHashedFlatPackage::writeTail(files::FileHandle& file, ByteView tail, const std::string& targetName) {
-    const bool isFirst = ticketStart_ == 0 && !hasTrailers_;
-    const std::uint64_t start = isFirst ? file.seekToEnd() : file.seek(ticketStart_);
-    if (isFirst) ticketStart_ = start + kTrailerSize;
+    const bool isFirst = trailers_.ticketStart == 0 && !trailers_.hasTrailers;
+    const std::uint64_t start = isFirst ? file.seekToEnd() : file.seek(trailers_.ticketStart);
+    if (isFirst) trailers_.ticketStart = start + kTrailerSize;
 
-    const std::uint64_t newEnd = ticketStart_ + tail.size();
-    if (origEOL_ < newEnd) file.reserve(newEnd - start);
-    std::uint64_t length = origEOL_;
-    if (dataToAppend_) file.truncate(length += kTrailerSize);
+    const std::uint64_t newEnd = trailers_.ticketStart + tail.size();
+    if (trailers_.fileSize < newEnd) file.reserve(newEnd - start);
+    std::uint64_t length = trailers_.fileSize;
+    if (trailers_.dataToAppend) file.truncate(length += kTrailerSize);
 
-    if (isFirst) file.seek(ticketStart_);
+    if (isFirst) file.seek(trailers_.ticketStart);
     file.write(tail);
     const std::uint64_t end = file.position();
     if (isFirst) {
         file.seek(start);
         file.write(kTerminatorTrailer.bytes);
     }
-    if (origEOL_ > end)
-        NoisyLog("Truncating %@ from to %llu bytes to %llu bytes.", targetName, origEOL_, end);
+    if (trailers_.fileSize > end)
+        NoisyLog("Truncating %@ from to %llu bytes to %llu bytes.", targetName, trailers_.fileSize, end);
     if (length > end) file.truncate(end);
     file.synchronize();
     file.close();

@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "codesign/code_signing.h"
+#include "codesign/superblob.h"
 #include "foundation/byte_reader.h"
 #include "foundation/byte_writer.h"
 #include "src/messages.h"
@@ -84,6 +85,27 @@ std::uint64_t lengthOf(const BlobRecord& record) {
 
 ByteView dataOf(const BlobRecord& record) {
     return *valueOf(record, kBlobDataKey).data();
+}
+
+std::string_view slotName(std::uint32_t slot) {
+    switch (slot) {
+        case codesign::kSlotCodeDirectory:
+            return "code directory";
+        case codesign::kSlotRequirements:
+            return "requirements";
+        case codesign::kSlotEntitlements:
+            return "entitlements";
+        case codesign::kSlotDerEntitlements:
+            return "entitlements (DER)";
+        case codesign::kSlotCms:
+            return "signer's message";
+        case kTicketSlotType:
+            return "ticket";
+        default:
+            break;
+    }
+    const bool alternate = slot >= codesign::kSlotFirstAlternate && slot <= codesign::kSlotLastAlternate;
+    return alternate ? "alternate code directory" : "unknown";
 }
 
 std::optional<BlobSet> orderedBlobSetForSuperBlob(ByteView superblob, std::uint32_t numberOfBlobs) {

@@ -18,6 +18,7 @@
 
 #include <cstdint>
 #include <optional>
+#include <string_view>
 #include <vector>
 
 #include "foundation/value.h"
@@ -32,6 +33,9 @@ inline constexpr std::uint32_t kBlobHeaderSize = 8;
 /// The slot that a stapled ticket stands in, and the magic of its blob.
 inline constexpr std::uint32_t kTicketSlotType = 0x10002;
 inline constexpr std::uint32_t kTicketBlobMagic = 0xFADE0B01;
+
+/// What a slot holds, in words; "unknown" for one that we do not know.
+std::string_view slotName(std::uint32_t slot);
 
 /// Keys of a blob record.
 inline constexpr std::string_view kSlotTypeKey = "cs slot type";  // number, 32 bits

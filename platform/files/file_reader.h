@@ -1,0 +1,45 @@
+// Reading an open regular file, piece by piece: the half of a file handle that parsers need.
+//
+// All calls block; one reader serves one thread at a time.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <stdexcept>
+#include <string>
+
+#include "foundation/error.h"
+
+namespace pinwell::files {
+
+/// A reader's or a file handle's failure. `what()` is the reason text: what was tried, on which file, and the
+/// system's word for why not.
+class FileHandleError : public std::runtime_error {
+  public:
+    using std::runtime_error::runtime_error;
+};
+
+/// An open regular file. The operations throw FileHandleError.
+class FileReader {
+  public:
+    virtual ~FileReader() = default;
+
+    /// Both answer the new position, in bytes from the start. A position past the end is one.
+    virtual std::uint64_t seekToEnd() = 0;
+    virtual std::uint64_t seek(std::uint64_t position) = 0;
+    virtual std::uint64_t position() = 0;
+
+    /// Up to `length` bytes; fewer only at the end of the file. Memory grows with what is really read.
+    virtual foundation::Data read(std::uint64_t length) = 0;
+};
+
+/// The regular file at `path`, opened close-on-exec. Follows no link in the last component and never blocks
+/// on what is no regular file (EINVAL, EISDIR, ELOOP).
+foundation::Result<std::unique_ptr<FileReader>> openReader(const std::string& path);
+
+/// A reader of a descriptor that stays the caller's: it must be open for reading as long as the reader lives,
+/// and its own position is neither used nor moved. Anything but a regular file is refused as above. Errors
+/// speak of the file as `name`.
+foundation::Result<std::unique_ptr<FileReader>> readerOf(int descriptor, std::string name);
+
+}  // namespace pinwell::files

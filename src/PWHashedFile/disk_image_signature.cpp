@@ -1,0 +1,144 @@
+#include "src/PWHashedFile/disk_image_signature.h"
+
+#include <algorithm>
+#include <array>
+#include <limits>
+
+#include "codesign/code_signing.h"
+#include "foundation/byte_reader.h"
+#include "foundation/process.h"
+#include "src/messages.h"
+
+namespace pinwell {
+namespace {
+
+using foundation::ByteReader;
+using foundation::ByteView;
+
+/// The least that a blob takes: its index entry and its header.
+constexpr std::uint64_t kMinimumBlobFootprint = kBlobIndexEntrySize + kBlobHeaderSize;
+
+// Whether `step` went through; a failure's reason goes to `report`.
+template <class Step, class Report>
+void attempt(Step&& step, Report&& report) {
+    try {
+        step();
+    } catch (const files::FileHandleError& failure) {
+        report(failure.what());
+    }
+}
+
+}  // namespace
+
+bool disk_image_signature::refuse(std::uint64_t offset, const char* rule) {
+    fault = {offset, rule};
+    return false;
+}
+
+// What cannot be read is only said here: the zeros in its place fail the next check, with a message of its
+// own.
+bool readDiskImageTrailer(files::FileReader& file, const std::string& name, disk_image_signature& into) {
+    attempt([&] { into.fileSize = file.seekToEnd(); },
+            [&](const char* reason) {
+                NoisyLog("Could not get file size of %@. This should not have happened. %@", name, reason);
+            });
+    if (into.fileSize < kUDIFHeaderSize) {
+        NoisyLog("%@ is too small (%llu bytes) to be a proper disk image", name, into.fileSize);
+        return into.refuse(0, "the file is too small for a disk image's trailer");
+    }
+    const std::uint64_t trailerStart = into.fileSize - kUDIFHeaderSize;
+    attempt(
+        [&] {
+            file.seek(trailerStart);
+            into.trailer.assign(file.read(kUDIFHeaderSize));
+        },
+        [&](const char* reason) {
+            NoisyLog("Could read UDIF header of %@. This should not have happened. %@", name, reason);
+        });
+    if (!into.trailer.hasMagic()) {
+        NoisyLog("Not a supported disk image format, %d", into.trailer.magicAsShown());
+        return into.refuse(trailerStart, "the file does not end in a disk image's trailer");
+    }
+    if (into.trailer.version() != kUDIFVersion) {
+        NoisyLog("%@ only supports version %d disk images while %@ is version %d.", foundation::processName(),
+                 kUDIFVersion, name, into.trailer.version());
+        return into.refuse(trailerStart + 4, "the trailer's version is not 4");
+    }
+    into.csStart = into.trailer.codeSignOffset();
+    into.csLength = into.trailer.codeSignLength();
+    return true;
+}
+
+bool readDiskImageSuperblob(files::FileReader& file, const std::string& name, disk_image_signature& into) {
+    NoisyLog("Codesign offset 0x%llx length: %llu", into.csStart, into.csLength);
+    const std::uint64_t trailerStart = into.fileSize - kUDIFHeaderSize;
+    const std::uint64_t fields = trailerStart + kUDIFCodeSignFieldsOffset;
+    if (into.csLength > std::numeric_limits<std::uint64_t>::max() - into.csStart)
+        return into.refuse(fields, "the signature's offset and length are out of range");
+    const std::uint64_t end = into.csStart + into.csLength;
+    if (end != trailerStart) {
+        NoisyLog(
+            "In a good disk image, the stored code signature end MUST match the UDIF header start. It "
+            "currently "
+            "doesn't. (%llu vs %llu)",
+            end, trailerStart);
+        return into.refuse(fields, "the signature does not end where the trailer begins");
+    }
+    if (into.csLength > codesign::kMaximumSuperBlobLength)
+        return into.refuse(fields, "the signature is too long");
+    attempt(
+        [&] {
+            file.seek(into.csStart);
+            into.superblob = file.read(into.csLength);
+        },
+        [&](const char* reason) {
+            NoisyLog("Could read code signature header of %@. This should not have happened. %@", name,
+                     reason);
+        });
+    return into.superblob.size() == into.csLength ||
+           into.refuse(into.csStart, "the signature cannot be read");
+}
+
+bool readDiskImageBlobs(const std::string& name, disk_image_signature& into) {
+    std::array<std::byte, kSuperblobHeaderSize> header{};  // of a shorter superblob the rest is zero
+    const ByteView start = ByteView(into.superblob).first(std::min(into.superblob.size(), header.size()));
+    std::copy(start.begin(), start.end(), header.begin());
+    ByteReader reader(header);
+    if (reader.be32("superblob magic") != kSuperblobMagic) {
+        NoisyLog("Not a supported code signature block, %d", ByteReader(header).le32("superblob magic"));
+        return into.refuse(into.csStart, "the superblob does not begin with its magic");
+    }
+    const std::uint32_t length = reader.be32("superblob length");
+    into.numBlobs = reader.be32("superblob count");
+    NoisyLog("Stored Codesign length: %u number of blobs: %d", length, into.numBlobs);
+
+    const std::uint64_t mostBlobs = into.csLength / kMinimumBlobFootprint;
+    if (mostBlobs < into.numBlobs) {
+        NoisyLog("%tu blobs in %@ exceeds the maximum possible number of blobs, %d", mostBlobs, name,
+                 into.numBlobs);
+        return into.refuse(into.csStart + 8, "the superblob counts more blobs than it has room for");
+    }
+    if (into.csLength != length) {
+        NoisyLog("The code signature block must be %llu bytes in length. However, it is %d.", into.csLength,
+                 length);
+        return into.refuse(into.csStart + 4, "the superblob's length is not the one in the trailer");
+    }
+    into.blobs = orderedBlobSetForSuperBlob(into.superblob, into.numBlobs).value_or(BlobSet{});
+    return into.blobs.size() == into.numBlobs ||
+           into.refuse(into.csStart + kSuperblobHeaderSize,
+                       "the blobs do not fill the superblob back to back");
+}
+
+const BlobRecord* ticketBlobOf(const BlobSet& blobs) {
+    const auto found = std::find_if(blobs.rbegin(), blobs.rend(), [](const BlobRecord& record) {
+        return slotTypeOf(record) == kTicketSlotType;
+    });
+    return found == blobs.rend() ? nullptr : &*found;
+}
+
+ByteView ticketIn(const BlobRecord& blob) {
+    const ByteView whole = dataOf(blob);
+    return whole.subspan(std::min<std::size_t>(kBlobHeaderSize, whole.size()));
+}
+
+}  // namespace pinwell

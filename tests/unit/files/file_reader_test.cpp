@@ -1,0 +1,102 @@
+#include "files/file_reader.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <limits>
+
+#include "fixture.h"
+#include "foundation/file_io.h"
+
+namespace pinwell::test {
+namespace {
+
+using files::FileHandleError;
+using files::FileReader;
+using foundation::FileDescriptor;
+using foundation::toString;
+
+class Reader : public FilesTest {
+  protected:
+    FileDescriptor opened(const std::string& contents) {
+        writeFile(path("file"), contents);
+        return FileDescriptor(open(path("file").c_str(), O_RDONLY | O_CLOEXEC));
+    }
+
+    std::int64_t refusalOf(int descriptor) {
+        const auto reader = files::readerOf(descriptor, "it");
+        return reader ? 0 : reader.error().code();
+    }
+};
+
+TEST_F(Reader, ReadsAPathFromAnyPosition) {
+    writeFile(path("file"), "0123456789");
+    const auto reader = files::openReader(path("file"));
+    ASSERT_TRUE(reader);
+    EXPECT_EQ((*reader)->seekToEnd(), 10U);
+    EXPECT_EQ((*reader)->seek(4), 4U);
+    EXPECT_EQ(toString((*reader)->read(3)), "456");
+    EXPECT_EQ((*reader)->position(), 7U);
+}
+
+TEST_F(Reader, RefusesAPathThatIsALink) {
+    writeFile(path("file"), "x");
+    ASSERT_EQ(symlink("file", path("link").c_str()), 0);
+    const auto reader = files::openReader(path("link"));
+    ASSERT_FALSE(reader);
+    EXPECT_EQ(reader.error().code(), ELOOP);
+}
+
+TEST_F(Reader, ReadsADescriptorWithoutMovingIt) {
+    const FileDescriptor descriptor = opened("0123456789");
+    ASSERT_EQ(lseek(descriptor.get(), 2, SEEK_SET), 2);
+    const auto reader = files::readerOf(descriptor.get(), "it");
+    ASSERT_TRUE(reader);
+    EXPECT_EQ((*reader)->seekToEnd(), 10U);
+    EXPECT_EQ((*reader)->seek(6), 6U);
+    EXPECT_EQ(toString((*reader)->read(100)), "6789");
+    EXPECT_EQ((*reader)->position(), 10U);
+    EXPECT_EQ(lseek(descriptor.get(), 0, SEEK_CUR), 2);
+}
+
+TEST_F(Reader, LeavesTheDescriptorOpen) {
+    const FileDescriptor descriptor = opened("0123456789");
+    { ASSERT_TRUE(files::readerOf(descriptor.get(), "it")); }
+    EXPECT_NE(fcntl(descriptor.get(), F_GETFD), -1);
+}
+
+TEST_F(Reader, ReadsNothingBehindTheEnd) {
+    const FileDescriptor descriptor = opened("0123456789");
+    const auto reader = files::readerOf(descriptor.get(), "it");
+    ASSERT_TRUE(reader);
+    (*reader)->seek(1'000'000);
+    EXPECT_TRUE((*reader)->read(10).empty());
+}
+
+TEST_F(Reader, FailsAtAPositionThatNoFileHas) {
+    const FileDescriptor descriptor = opened("0123456789");
+    const auto reader = files::readerOf(descriptor.get(), "it");
+    ASSERT_TRUE(reader);
+    (*reader)->seek(std::numeric_limits<std::uint64_t>::max());
+    EXPECT_THROW((*reader)->read(1), FileHandleError);
+}
+
+TEST_F(Reader, FailsToReadWhatIsOpenForWritingAlone) {
+    writeFile(path("file"), "0123456789");
+    const FileDescriptor descriptor(open(path("file").c_str(), O_WRONLY | O_CLOEXEC));
+    const auto reader = files::readerOf(descriptor.get(), "it");
+    ASSERT_TRUE(reader);
+    EXPECT_THROW((*reader)->read(1), FileHandleError);
+}
+
+TEST_F(Reader, RefusesDescriptorsOfAnythingButARegularFile) {
+    const FileDescriptor folder(open(path(".").c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    EXPECT_EQ(refusalOf(folder.get()), EISDIR);
+    const FileDescriptor device(open("/dev/null", O_RDONLY | O_CLOEXEC));
+    EXPECT_EQ(refusalOf(device.get()), EINVAL);
+    EXPECT_EQ(refusalOf(-1), EBADF);
+}
+
+}  // namespace
+}  // namespace pinwell::test
