@@ -1,6 +1,6 @@
 // The steps inside satchel_verify_signature, with the statuses that tell its refusals apart.
 //
-// For satchel.cpp, its tests, and the companion that explains a refusal. The statuses end at
+// For satchel.cpp, its tests, and the companion and the library that explain a refusal. The statuses end at
 // satchel_verify_signature, which makes -1 of each.
 #pragma once
 

@@ -56,12 +56,16 @@ class DescriptorReader final : public FileReader {
 }  // namespace
 
 Result<std::unique_ptr<FileReader>> openReader(const std::string& path) {
+    if (path.find('\0') != std::string::npos) return Error::posix(EINVAL, path);
     auto file = openFileHandle(path, O_RDONLY);
     if (!file) return file.error();
     return std::unique_ptr<FileReader>(*std::move(file));
 }
 
 Result<std::unique_ptr<FileReader>> readerOf(int descriptor, std::string name) {
+    const int flags = fcntl(descriptor, F_GETFL);
+    if (flags < 0) return lastError(name);
+    if ((flags & O_ACCMODE) == O_WRONLY || (flags & O_PATH) != 0) return Error::posix(EBADF, name);
     struct stat status {};
     if (fstat(descriptor, &status) != 0) return lastError(name);
     if (const int reason = notRegularReason(status.st_mode); reason != 0) return Error::posix(reason, name);

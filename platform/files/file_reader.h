@@ -38,7 +38,8 @@ class FileReader {
 foundation::Result<std::unique_ptr<FileReader>> openReader(const std::string& path);
 
 /// A reader of a descriptor that stays the caller's: it must be open for reading as long as the reader lives,
-/// and its own position is neither used nor moved. Anything but a regular file is refused as above. Errors
+/// and its own position is neither used nor moved. Anything but a regular file is refused as above, and
+/// what cannot be read from with EBADF. Errors
 /// speak of the file as `name`.
 foundation::Result<std::unique_ptr<FileReader>> readerOf(int descriptor, std::string name);
 

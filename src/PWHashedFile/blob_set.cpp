@@ -79,8 +79,16 @@ std::uint32_t slotTypeOf(const BlobRecord& record) {
     return static_cast<std::uint32_t>(valueOf(record, kSlotTypeKey).unsignedIntegerValue());
 }
 
+std::uint32_t blobOffsetOf(const BlobRecord& record) {
+    return static_cast<std::uint32_t>(valueOf(record, kBlobOffsetKey).unsignedIntegerValue());
+}
+
 std::uint64_t lengthOf(const BlobRecord& record) {
     return valueOf(record, kBlobLengthKey).unsignedIntegerValue();
+}
+
+std::uint32_t blobMagicOf(const BlobRecord& record) {
+    return static_cast<std::uint32_t>(valueOf(record, kBlobMagicKey).unsignedIntegerValue());
 }
 
 ByteView dataOf(const BlobRecord& record) {

@@ -51,7 +51,9 @@ using BlobRecord = foundation::Dictionary;
 using BlobSet = std::vector<BlobRecord>;
 
 std::uint32_t slotTypeOf(const BlobRecord& record);
+std::uint32_t blobOffsetOf(const BlobRecord& record);
 std::uint64_t lengthOf(const BlobRecord& record);
+std::uint32_t blobMagicOf(const BlobRecord& record);
 foundation::ByteView dataOf(const BlobRecord& record);
 
 /// The blobs of a whole superblob that says it has `numberOfBlobs`. Nothing when index entries are missing or

@@ -82,12 +82,19 @@ TEST_F(Reader, FailsAtAPositionThatNoFileHas) {
     EXPECT_THROW((*reader)->read(1), FileHandleError);
 }
 
-TEST_F(Reader, FailsToReadWhatIsOpenForWritingAlone) {
+TEST_F(Reader, RefusesDescriptorsThatCannotBeReadFrom) {
     writeFile(path("file"), "0123456789");
-    const FileDescriptor descriptor(open(path("file").c_str(), O_WRONLY | O_CLOEXEC));
-    const auto reader = files::readerOf(descriptor.get(), "it");
-    ASSERT_TRUE(reader);
-    EXPECT_THROW((*reader)->read(1), FileHandleError);
+    for (const int access : {O_WRONLY, O_PATH}) {
+        const FileDescriptor descriptor(open(path("file").c_str(), access | O_CLOEXEC));
+        EXPECT_EQ(refusalOf(descriptor.get()), EBADF);
+    }
+}
+
+TEST_F(Reader, RefusesAPathWithAZeroByteInIt) {
+    writeFile(path("file"), "x");
+    const auto reader = files::openReader(path("file") + std::string(1, '\0') + "more");
+    ASSERT_FALSE(reader);
+    EXPECT_EQ(reader.error().code(), EINVAL);
 }
 
 TEST_F(Reader, RefusesDescriptorsOfAnythingButARegularFile) {
