@@ -129,6 +129,17 @@ TEST_F(Judging, NamesTheCertificateThatThePolicyRefuses) {
     EXPECT_EQ(validation.verdict, ticket::kVerdictRecoverableFailure);
 }
 
+TEST_F(Judging, EscapesTheNamesOfCertificates) {
+    TicketChain fields;
+    fields.leaf.subject = commonName("Evil \x1b[2J signer");
+    fields.leaf.markers.clear();
+    const IssuedChain evil = fields.issue();
+    const Validation validation =
+        ticket::validate(SatchelBuilder::of(evil, payload).build(), rootsOf(evil.root.der), kNow);
+    EXPECT_NE(validation.reason.find("Evil"), std::string::npos) << validation.reason;
+    EXPECT_EQ(validation.reason.find('\x1b'), std::string::npos) << validation.reason;
+}
+
 TEST_F(Judging, RefusesASignatureOfAnotherKey) {
     const Data forged =
         SatchelBuilder(ticketWith(payload)).signedBy(SigningKey::cached(KeyKind::p256, "forger")).build();
