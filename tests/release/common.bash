@@ -1,0 +1,28 @@
+# What the tests in this folder share. Sourced by each, after `set -euo pipefail`.
+
+fail() {
+  echo "FAILED: $*" >&2
+  exit 1
+}
+
+# A test that cannot run here says why and ends with 77, which ctest reports as skipped.
+skip() {
+  echo "SKIPPED: $*"
+  exit 77
+}
+
+# The long and short options in a program's help, one a line. They stand at the left of the table of options.
+options_in_help() {
+  sed -nE 's/^ +((-[a-z],)?--[a-z-]+).*/\1/p' | tr , '\n' | sort -u
+}
+
+# The subcommands in a program's help, one a line.
+subcommands_in_help() {
+  sed -n '/^Subcommands:/,$p' | sed -nE 's/^  ([a-z]+) .*/\1/p'
+}
+
+# same WHAT EXPECTED GOT: two lists of one entry a line hold the same.
+same() {
+  local difference
+  difference=$(diff <(sort -u <<< "$2") <(sort -u <<< "$3")) || fail "$1 (< expected, > found):"$'\n'"$difference"
+}
