@@ -1,0 +1,10 @@
+# Run by cpack when the files of all packages stand in folders of their own, before they are packed.
+file(GLOB trees LIST_DIRECTORIES true ${CPACK_TEMPORARY_DIRECTORY}/*)
+foreach(tree IN LISTS trees)
+  get_filename_component(group ${tree} NAME)
+  string(TOUPPER ${group} group)
+  execute_process(
+    COMMAND ${CMAKE_CURRENT_LIST_DIR}/finish-tree ${tree} ${CPACK_DEBIAN_${group}_PACKAGE_NAME} ${CPACK_PACKAGE_VERSION}
+            "${CPACK_PACKAGE_CONTACT}" "${CPACK_DEBIAN_${group}_PACKAGE_RECOMMENDS}" ${CPACK_PINWELL_COMPILED_IN_${group}}
+    COMMAND_ERROR_IS_FATAL ANY)
+endforeach()
