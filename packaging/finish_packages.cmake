@@ -1,5 +1,6 @@
-# Run by cpack when the packages are made: puts each one's bill of materials beside it.
+# Run by cpack when the packages are made: packs each again, and puts its bill of materials beside it.
 foreach(package IN LISTS CPACK_PACKAGE_FILES)
+  execute_process(COMMAND ${CMAKE_CURRENT_LIST_DIR}/repack ${package} COMMAND_ERROR_IS_FATAL ANY)
   get_filename_component(file ${package} NAME)
   string(REGEX REPLACE "_.*" "" name ${file})
   string(REGEX REPLACE "\\.deb$" ".spdx.json" bill ${file})
