@@ -12,9 +12,11 @@ programs=$1 page=$2
 recipes=$(cd "$(dirname "${BASH_SOURCE[0]}")" && pwd)
 skipped=125
 service=
+background=  # a process group
 
 work=$(mktemp -d)
 clean_up() {
+  [ -z "$background" ] || kill -- "-$background" 2> /dev/null || true
   # The order matters for one that has been stopped.
   if [ -n "$service" ]; then
     kill "$service" 2> /dev/null || true
