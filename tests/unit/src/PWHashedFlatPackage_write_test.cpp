@@ -266,6 +266,7 @@ TEST_F(FlatPackageWriting, CutShortAnywhereLeavesAFileThatCanBeStapledAgain) {
             put(before);
             test::TestPlatform failing;
             failing.files.answerCloning(false);
+            failing.files.answerTemporaryDirectory(foundation::URL::fileURLWithPath(temporary.path()));
             PWHashedFlatPackage file{url, failing.services()};
             file.ticketData();
             // Behind the question of cloning and the read of the ticket.
