@@ -89,9 +89,7 @@ struct Error {
 template <class T>
 using Result = std::variant<T, Error>;
 
-// ---- A ticket taken apart
-// ------------------------------------------------------------------------------------- None of these asks
-// whether the ticket is genuine.
+// A ticket taken apart. None of these asks whether the ticket is genuine.
 
 /// The container, located in the bytes of a ticket. At least one certificate and at most three.
 struct Container {
@@ -130,8 +128,7 @@ struct Entry {
 /// decodePayload() answered it.
 PINWELL_TICKET_API std::optional<Entry> entryAt(const Payload& payload, std::uint64_t index);
 
-// ---- Judging a ticket
-// -------------------------------------------------------------------------------------------
+// Judging a ticket.
 
 /// Certificates that a ticket's chain may end in. Immutable; copies share them.
 class TrustedRoots {
@@ -208,10 +205,8 @@ struct Validation {
 PINWELL_TICKET_API Validation validate(ByteView ticket, const TrustedRoots& roots,
                                        std::int64_t evaluationTime, std::span<const ByteView> cdhashes = {});
 
-// ---- Finding a ticket in a file
-// ----------------------------------------------------------------------------------- A bundle's ticket is
-// the file Contents/CodeResources by itself. By path, only a regular file is opened, and no link is followed
-// in the last component; nothing is opened that could block.
+// Finding a ticket in a file. A bundle's ticket is the file Contents/CodeResources by itself. By path, only a
+// regular file is opened, and no link is followed in the last component; nothing is opened that could block.
 
 struct Range {
     std::uint64_t offset = 0;
