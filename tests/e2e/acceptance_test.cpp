@@ -12,8 +12,6 @@ using testing::ElementsAre;
 using testing::IsEmpty;
 using testing::StartsWith;
 
-constexpr const char* kStapled = "The staple and validate action worked!";
-constexpr const char* kValidated = "The validate action worked!";
 constexpr const char* kRevoked =
     "The ticket for Sample.app has been revoked. Tollmark will prevent it from running.";
 
@@ -28,7 +26,7 @@ class Acceptance : public EndToEndTest {
         return validate();
     }
     testing::Matcher<const ProcessResult&> Worked() const {
-        return Ended(0, ElementsAre(processing(), processing(), kStapled));
+        return Ended(0, ElementsAre(processing(), processing(), kWorked));
     }
     std::string refusal() const { return "Could not validate ticket for " + bundle; }
     testing::Matcher<const ProcessResult&> Refused() const {

@@ -10,8 +10,6 @@ namespace {
 using testing::ElementsAre;
 using testing::IsEmpty;
 
-constexpr int kConnectionLost = 10;  // of URLErrorDomain
-
 /// How far an exchange has come.
 struct Phase {
     std::string title;

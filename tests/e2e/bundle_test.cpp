@@ -14,8 +14,6 @@ using testing::Contains;
 using testing::ElementsAre;
 using testing::StartsWith;
 
-constexpr const char* kWorked = "The staple and validate action worked!";
-
 class Bundle : public EndToEndTest {
   protected:
     Bundle() { serveTicket(genuine); }

@@ -37,6 +37,20 @@ void PrintTo(const ProcessResult& result, std::ostream* out);
 testing::Matcher<const ProcessResult&> Ended(int status,
                                              const testing::Matcher<std::vector<std::string>>& lines);
 
+/// The last line of a run that ended well.
+inline constexpr const char* kWorked = "The staple and validate action worked!";
+inline constexpr const char* kValidated = "The validate action worked!";
+
+// Codes of URLErrorDomain.
+inline constexpr int kCancelled = 1;
+inline constexpr int kUnsupportedURL = 2;
+inline constexpr int kCannotConnect = 4;
+inline constexpr int kTooManyRedirects = 6;
+inline constexpr int kTooLarge = 7;
+inline constexpr int kSecureConnectionFailed = 8;
+inline constexpr int kBadServerResponse = 9;
+inline constexpr int kConnectionLost = 10;
+inline constexpr int kProxyFailed = 11;
 /// For failures that different versions of the transfer library tell apart differently.
 inline constexpr int kAnyCode = 0;
 

@@ -15,8 +15,6 @@ using testing::IsEmpty;
 using testing::Matcher;
 using testing::StartsWith;
 
-constexpr int kCancelled = 1;  // of URLErrorDomain
-constexpr const char* kWorked = "The staple and validate action worked!";
 constexpr const char* kHost = "api.lumora.example";
 
 struct NameRow {

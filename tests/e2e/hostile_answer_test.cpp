@@ -18,13 +18,6 @@ using testing::Not;
 using testing::SizeIs;
 using testing::StartsWith;
 
-// Codes of URLErrorDomain.
-constexpr int kUnsupportedURL = 2;
-constexpr int kTooManyRedirects = 6;
-constexpr int kTooLarge = 7;
-
-constexpr const char* kWorked = "The staple and validate action worked!";
-
 struct Row {
     std::string title;
     std::string text;

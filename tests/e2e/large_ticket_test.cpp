@@ -14,8 +14,6 @@ using testing::IsEmpty;
 using testing::Matcher;
 using testing::StartsWith;
 
-constexpr const char* kWorked = "The staple and validate action worked!";
-
 class LargeTicket : public EndToEndTest {
   protected:
     Matcher<const ProcessResult&> Worked() const {

@@ -18,7 +18,6 @@ using testing::SizeIs;
 using testing::StartsWith;
 
 constexpr const char* kUniqueName = "[0-9A-F]{8}(-[0-9A-F]{4}){3}-[0-9A-F]{12}\\.ticket";
-constexpr const char* kWorked = "The staple and validate action worked!";
 
 class Lookup : public EndToEndTest {
   protected:

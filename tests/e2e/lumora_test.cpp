@@ -13,9 +13,6 @@ using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::StartsWith;
 
-constexpr const char* kStapled = "The staple and validate action worked!";
-constexpr const char* kValidated = "The validate action worked!";
-
 class LocalService : public LocalServiceTest {
   protected:
     LocalService() { bundle = samples.at(0); }
@@ -23,7 +20,7 @@ class LocalService : public LocalServiceTest {
     ProcessResult stapleAt(const std::string& path) const { return pinwell({"staple", path}); }
 
     testing::Matcher<const ProcessResult&> Stapled() const {
-        return Ended(0, ElementsAre(processing(), processing(), kStapled));
+        return Ended(0, ElementsAre(processing(), processing(), kWorked));
     }
     testing::Matcher<const ProcessResult&> Validated() const {
         return Ended(0, ElementsAre(processing(), kValidated));
@@ -72,11 +69,10 @@ TEST_F(LocalService, ARevokedArtefactCanBeIssuedATicketAgain) {
 TEST_F(LocalService, DeliversTicketsAsAssets) {
     record("issue", {bundle, "--asset"});
     serveRecords();
-    EXPECT_THAT(
-        pinwell({"staple", "-v", bundle}),
-        Ended(0, AllOf(Contains(AllOf(StartsWith("URL of large ticket asset: https://127.0.0.1:"),
-                                      HasSubstr("lmasset.ticket"))),
-                       Contains(StartsWith("Downloaded large ticket size is ")), Contains(kStapled))));
+    EXPECT_THAT(pinwell({"staple", "-v", bundle}),
+                Ended(0, AllOf(Contains(AllOf(StartsWith("URL of large ticket asset: https://127.0.0.1:"),
+                                              HasSubstr("lmasset.ticket"))),
+                               Contains(StartsWith("Downloaded large ticket size is ")), Contains(kWorked))));
     EXPECT_THAT(validate(), Validated());
     record("revoke", {bundle});
     EXPECT_THAT(validate(), RefusedAsRevoked());
@@ -103,7 +99,7 @@ TEST_F(LocalService, IssuesForSeveralArtefactsAtOnce) {
     serveRecords();
     for (const std::string& path : bundles)
         EXPECT_THAT(stapleAt(path),
-                    Ended(0, ElementsAre("Processing: " + path, "Processing: " + path, kStapled)));
+                    Ended(0, ElementsAre("Processing: " + path, "Processing: " + path, kWorked)));
     // Each has its own: one of another's is refused.
     std::filesystem::copy_file(bundles[1] + "/Contents/CodeResources", bundles[2] + "/Contents/CodeResources",
                                std::filesystem::copy_options::overwrite_existing);

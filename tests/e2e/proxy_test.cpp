@@ -17,13 +17,6 @@ using testing::IsEmpty;
 using testing::Matcher;
 using testing::Not;
 
-// Codes of URLErrorDomain.
-constexpr int kCannotConnect = 4;
-constexpr int kSecureConnectionFailed = 8;
-constexpr int kProxyFailed = 11;
-
-constexpr const char* kWorked = "The staple and validate action worked!";
-
 /// A port of the loopback address that nobody listened at a moment ago.
 std::uint16_t freePort() {
     const foundation::FileDescriptor socket(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));

@@ -17,8 +17,6 @@ using testing::Matcher;
 using testing::Not;
 using testing::StartsWith;
 
-constexpr int kCancelled = 1;  // of URLErrorDomain
-constexpr const char* kWorked = "The staple and validate action worked!";
 constexpr foundation::Date kLongAgo{1600000000};
 constexpr foundation::Date kFarAhead{2500000000};
 

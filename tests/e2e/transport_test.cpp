@@ -12,16 +12,6 @@ using testing::HasSubstr;
 using testing::IsEmpty;
 using testing::StartsWith;
 
-// Codes of URLErrorDomain.
-constexpr int kUnsupportedURL = 2;
-constexpr int kCannotConnect = 4;
-constexpr int kTooManyRedirects = 6;
-constexpr int kTooLarge = 7;
-constexpr int kSecureConnectionFailed = 8;
-constexpr int kBadServerResponse = 9;
-constexpr int kConnectionLost = 10;
-
-constexpr const char* kWorked = "The staple and validate action worked!";
 constexpr std::size_t kMebibyte = std::size_t{1} << 20U;
 
 class Transport : public EndToEndTest {
