@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include <sstream>
+
 #include "codesign/code_error.h"
 #include "foundation/byte_reader.h"
 #include "foundation/byte_writer.h"
@@ -57,7 +59,8 @@ TEST_P(CodeHash, IsTheDigestCutToTheSizeThatTicketsList) {
 }
 
 INSTANTIATE_TEST_SUITE_P(DigestTypes, CodeHash,
-                         ::testing::Values(Kind{1, 20}, Kind{2, 20}, Kind{3, 20}, Kind{4, 48}));
+                         ::testing::Values(Kind{1, 20}, Kind{2, 20}, Kind{3, 20}, Kind{4, 48}),
+                         [](const auto& kind) { return "OfType" + std::to_string(kind.param.type); });
 
 class CodeDirectoryVersion : public ::testing::TestWithParam<std::uint32_t> {};
 
@@ -71,7 +74,12 @@ TEST_P(CodeDirectoryVersion, IsReadWithItsOwnHeader) {
 
 INSTANTIATE_TEST_SUITE_P(Accepted, CodeDirectoryVersion,
                          ::testing::Values(0x20001U, 0x200FFU, 0x20100U, 0x20200U, 0x20300U, 0x20400U,
-                                           0x20500U, 0x20600U, 0x2FFFFU));
+                                           0x20500U, 0x20600U, 0x2FFFFU),
+                         [](const auto& version) {
+                             std::ostringstream name;
+                             name << "Version" << std::hex << std::uppercase << version.param;
+                             return name.str();
+                         });
 
 TEST(CodeDirectory, RefusesVersionsOutsideItsRange) {
     expectRefused(CodeDirectoryBuilder().version(0x20000));

@@ -140,7 +140,8 @@ TEST_P(CoveredComponent, MayBeMissing) {
     EXPECT_EQ(validityOf(SuperBlobBuilder().blob(0, directory)), kSuccess);
 }
 
-INSTANTIATE_TEST_SUITE_P(Slots, CoveredComponent, ::testing::Values(2U, 5U, 7U));
+INSTANTIATE_TEST_SUITE_P(Slots, CoveredComponent, ::testing::Values(2U, 5U, 7U),
+                         [](const auto& slot) { return "InSlot" + std::to_string(slot.param); });
 
 TEST_F(StaticValidity, DoesNotAskForPropertyListsOrResources) {
     const Data directory = CodeDirectoryBuilder()

@@ -122,7 +122,10 @@ TEST_P(SignedImage, DescribesItselfInTheCodeDirectory) {
     EXPECT_TRUE(reader.atEnd());
 }
 
-INSTANTIATE_TEST_SUITE_P(Processors, SignedImage, testing::Values(kCpuTypeArm64, kCpuTypeX86_64));
+INSTANTIATE_TEST_SUITE_P(Processors, SignedImage, testing::Values(kCpuTypeArm64, kCpuTypeX86_64),
+                         [](const auto& processor) {
+                             return processor.param == kCpuTypeArm64 ? "Arm64" : "X86_64";
+                         });
 
 TEST(UniversalImage, ListsItsSlicesAtAlignedPlaces) {
     const Data first(20'000, std::byte{1});
