@@ -1,4 +1,6 @@
 // Tickets that are delivered as a file of their own.
+#include <sys/resource.h>
+
 #include <csignal>
 #include <filesystem>
 
@@ -232,6 +234,18 @@ TEST_F(LargeTicket, ATemporaryDirectoryThatIsNotThereParksTheRun) {
     environment["TMPDIR"] = directory / "nowhere";
     serveAsset(genuine);
     expectParked(DownloadFailed());
+}
+
+TEST_F(LargeTicket, ADownloadThatCannotBeKeptParksTheRunAndNoSignalEndsIt) {
+    serveAsset(genuine);
+    rlimit before{};
+    ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &before), 0);
+    // Inherited by the tool, as a full disk would be by both.
+    const rlimit small{genuine.size() - 1, before.rlim_max};
+    ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &small), 0);
+    expectParked(DownloadFailed("could not be written"));
+    ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &before), 0);
+    EXPECT_THAT(temporaryFiles(), IsEmpty());
 }
 
 TEST_F(LargeTicket, AParkedRunIsSilentInQuietMode) {
