@@ -21,14 +21,8 @@ bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& sou
         return false;
     };
 
-    Data ticket;  // from here on: empty when one is deleted, and only then
-    if (source && !deleteExisting) {
-        auto contents = platform().files.contentsOfFile(*source);
-        if (contents)
-            ticket = *std::move(contents);
-        else
-            held = contents.error();
-    }
+    // Empty when one is deleted, and behind the next check only then.
+    const Data ticket = deleteExisting ? Data{} : readTicket(source, held);
     const bool fitsABlob = !ticket.empty() && ticket.size() <= std::numeric_limits<std::uint32_t>::max();
     if (!deleteExisting && !fitsABlob) {
         NoisyLog("Cannot add a new ticket to %@. %@", name, held);

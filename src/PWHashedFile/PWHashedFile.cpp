@@ -86,6 +86,14 @@ std::optional<URL> PWHashedFile::makeWorkingCopy() {
     return copy;
 }
 
+Data PWHashedFile::readTicket(const std::optional<URL>& source, std::optional<Error>& held) const {
+    if (!source) return {};
+    auto contents = platform_.files.contentsOfFile(*source);
+    if (contents) return *std::move(contents);
+    held = contents.error();
+    return {};
+}
+
 void PWHashedFile::noteState() {
     if (!stateWhenRead_) stateWhenRead_ = platform_.files.stateOfItem(*fileURL_);
 }

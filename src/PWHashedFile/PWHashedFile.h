@@ -103,6 +103,10 @@ class PWHashedFile {
     virtual std::string_view className() const { return "PWHashedFile"; }
     const Platform& platform() const noexcept { return platform_; }
 
+    /// The ticket in that file; empty when there is none to be had, with the reason in `held` when reading
+    /// failed.
+    Data readTicket(const std::optional<URL>& source, std::optional<Error>& held) const;
+
     /// Remembers what state the file is in, the first time only. A kind calls it before it reads what its
     /// write will go by; without it, every state is good enough to be written to.
     void noteState();

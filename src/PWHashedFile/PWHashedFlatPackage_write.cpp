@@ -20,14 +20,8 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
         return false;
     };
 
-    Data ticket;  // from here on: empty when one is deleted, and only then
-    if (source && !deleteExisting) {
-        auto contents = platform().files.contentsOfFile(*source);
-        if (contents)
-            ticket = *std::move(contents);
-        else
-            held = contents.error();
-    }
+    // Empty when one is deleted, and behind the next check only then.
+    const Data ticket = deleteExisting ? Data{} : readTicket(source, held);
     if (!deleteExisting && !isWritableTicketLength(ticket.size())) {
         NoisyLog("Cannot add a new ticket to %@. %@", targetName, held);
         return fail();
