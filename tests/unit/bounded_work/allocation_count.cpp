@@ -2,7 +2,8 @@
 
 #include <algorithm>
 #include <cstdlib>
-#include <new>
+
+#include "support/replaced_allocation.h"
 
 namespace {
 
@@ -14,7 +15,11 @@ struct Tally {
 };
 thread_local Tally tally;
 
-void* allocate(std::size_t size) noexcept {
+}  // namespace
+
+namespace pinwell::test {
+
+void* allocateBlock(std::size_t size) noexcept {
     if (tally.counting) {
         ++tally.blocks;
         tally.bytes += size;
@@ -22,47 +27,6 @@ void* allocate(std::size_t size) noexcept {
     }
     return std::malloc(std::max<std::size_t>(size, 1));
 }
-
-void* allocateOrThrow(std::size_t size) {
-    void* block = allocate(size);
-    if (block == nullptr) throw std::bad_alloc();
-    return block;
-}
-
-}  // namespace
-
-void* operator new(std::size_t size) {
-    return allocateOrThrow(size);
-}
-void* operator new[](std::size_t size) {
-    return allocateOrThrow(size);
-}
-void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
-    return allocate(size);
-}
-void* operator new[](std::size_t size, const std::nothrow_t&) noexcept {
-    return allocate(size);
-}
-void operator delete(void* block) noexcept {
-    std::free(block);
-}
-void operator delete[](void* block) noexcept {
-    std::free(block);
-}
-void operator delete(void* block, std::size_t) noexcept {
-    std::free(block);
-}
-void operator delete[](void* block, std::size_t) noexcept {
-    std::free(block);
-}
-void operator delete(void* block, const std::nothrow_t&) noexcept {
-    std::free(block);
-}
-void operator delete[](void* block, const std::nothrow_t&) noexcept {
-    std::free(block);
-}
-
-namespace pinwell::test {
 
 AllocationCount::AllocationCount() {
     tally = {.counting = true};

@@ -8,22 +8,13 @@
 #include "src/satchel_internal.h"
 #include "src/tm_ticket.h"
 #include "support/fake_trust_service.h"
+#include "support/replaced_allocation.h"
 #include "support/ticket_builder.h"
 
 namespace {
 
 constexpr std::size_t kNever = static_cast<std::size_t>(-1);
 thread_local std::size_t failingSize = kNever;
-
-void* allocate(std::size_t size) noexcept {
-    return size >= failingSize ? nullptr : std::malloc(size + 1);
-}
-
-void* allocateOrThrow(std::size_t size) {
-    void* block = allocate(size);
-    if (block == nullptr) throw std::bad_alloc();
-    return block;
-}
 
 // While it lives, this thread gets no block of that size or more.
 class MemoryShortage {
@@ -36,35 +27,8 @@ class MemoryShortage {
 
 }  // namespace
 
-void* operator new(std::size_t size) {
-    return allocateOrThrow(size);
-}
-void* operator new[](std::size_t size) {
-    return allocateOrThrow(size);
-}
-void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
-    return allocate(size);
-}
-void* operator new[](std::size_t size, const std::nothrow_t&) noexcept {
-    return allocate(size);
-}
-void operator delete(void* block) noexcept {
-    std::free(block);
-}
-void operator delete[](void* block) noexcept {
-    std::free(block);
-}
-void operator delete(void* block, std::size_t) noexcept {
-    std::free(block);
-}
-void operator delete[](void* block, std::size_t) noexcept {
-    std::free(block);
-}
-void operator delete(void* block, const std::nothrow_t&) noexcept {
-    std::free(block);
-}
-void operator delete[](void* block, const std::nothrow_t&) noexcept {
-    std::free(block);
+void* pinwell::test::allocateBlock(std::size_t size) noexcept {
+    return size >= failingSize ? nullptr : std::malloc(size + 1);
 }
 
 namespace pinwell {
