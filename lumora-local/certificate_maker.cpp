@@ -21,9 +21,9 @@ constexpr int kSerialNumberBits = 159;
 // The markers count by their presence alone; their value is an ASN.1 NULL.
 constexpr std::array<unsigned char, 2> kMarkerValue{0x05, 0x00};
 
-using BigNumberHandle = std::unique_ptr<BIGNUM, OpenSSLDeleter<BN_free>>;
-using ObjectHandle = std::unique_ptr<ASN1_OBJECT, OpenSSLDeleter<ASN1_OBJECT_free>>;
-using OctetStringHandle = std::unique_ptr<ASN1_OCTET_STRING, OpenSSLDeleter<ASN1_OCTET_STRING_free>>;
+using BigNumberHandle = foundation::Handle<BIGNUM, BN_free>;
+using ObjectHandle = foundation::Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
+using OctetStringHandle = foundation::Handle<ASN1_OCTET_STRING, ASN1_OCTET_STRING_free>;
 
 void setSerialNumber(X509* certificate) {
     const BigNumberHandle number(BN_new());

@@ -9,10 +9,10 @@
 
 #include <array>
 #include <cerrno>
-#include <memory>
 #include <system_error>
 
 #include "foundation/format.h"
+#include "foundation/handle.h"
 #include "lumora-local/failure.h"
 
 namespace pinwell::lumora {
@@ -24,10 +24,7 @@ using foundation::format;
 constexpr int kBacklog = 128;
 constexpr int kPauseWhenShortMilliseconds = 50;
 
-struct AddressListDeleter {
-    void operator()(addrinfo* list) const noexcept { ::freeaddrinfo(list); }
-};
-using AddressList = std::unique_ptr<addrinfo, AddressListDeleter>;
+using AddressList = foundation::Handle<addrinfo, ::freeaddrinfo>;
 
 AddressList resolve(const Endpoint& endpoint) {
     addrinfo hints{};

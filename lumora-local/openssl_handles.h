@@ -9,28 +9,20 @@
 #include <openssl/x509v3.h>
 
 #include <array>
-#include <memory>
 #include <string>
 
 #include "foundation/bytes.h"
 #include "foundation/format.h"
+#include "foundation/handle.h"
 #include "lumora-local/failure.h"
 
 namespace pinwell::lumora {
 
-template <auto Free>
-struct OpenSSLDeleter {
-    template <class T>
-    void operator()(T* object) const noexcept {
-        Free(object);
-    }
-};
-
-using KeyHandle = std::unique_ptr<EVP_PKEY, OpenSSLDeleter<EVP_PKEY_free>>;
-using CertificateHandle = std::unique_ptr<X509, OpenSSLDeleter<X509_free>>;
-using ExtensionHandle = std::unique_ptr<X509_EXTENSION, OpenSSLDeleter<X509_EXTENSION_free>>;
-using BioHandle = std::unique_ptr<BIO, OpenSSLDeleter<BIO_free_all>>;
-using DigestContextHandle = std::unique_ptr<EVP_MD_CTX, OpenSSLDeleter<EVP_MD_CTX_free>>;
+using KeyHandle = foundation::Handle<EVP_PKEY, EVP_PKEY_free>;
+using CertificateHandle = foundation::Handle<X509, X509_free>;
+using ExtensionHandle = foundation::Handle<X509_EXTENSION, X509_EXTENSION_free>;
+using BioHandle = foundation::Handle<BIO, BIO_free_all>;
+using DigestContextHandle = foundation::Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
 
 /// The library speaks of unsigned characters where we say bytes.
 inline const unsigned char* octets(foundation::ByteView bytes) {

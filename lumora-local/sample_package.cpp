@@ -31,7 +31,7 @@ constexpr std::string_view kPackageInfo =
     "          install-location=\"/\" auth=\"none\"/>\n";
 constexpr std::string_view kReadMe = "A sample package, to try a record service with.\n";
 
-using MessageHandle = std::unique_ptr<CMS_ContentInfo, OpenSSLDeleter<CMS_ContentInfo_free>>;
+using MessageHandle = foundation::Handle<CMS_ContentInfo, CMS_ContentInfo_free>;
 
 // It is certificates that the stack owns, not itself alone.
 struct FreeStack {

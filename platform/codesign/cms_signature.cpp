@@ -10,7 +10,8 @@
 #include <array>
 #include <chrono>
 #include <ctime>
-#include <memory>
+
+#include "foundation/handle.h"
 
 namespace pinwell::codesign {
 
@@ -19,16 +20,9 @@ using foundation::Date;
 
 namespace {
 
-template <auto free>
-struct Deleter {
-    template <class T>
-    void operator()(T* object) const noexcept {
-        free(object);
-    }
-};
-using Message = std::unique_ptr<CMS_ContentInfo, Deleter<CMS_ContentInfo_free>>;
-using Bio = std::unique_ptr<BIO, Deleter<BIO_free_all>>;
-using TstInfo = std::unique_ptr<TS_TST_INFO, Deleter<TS_TST_INFO_free>>;
+using Message = foundation::Handle<CMS_ContentInfo, CMS_ContentInfo_free>;
+using Bio = foundation::Handle<BIO, BIO_free_all>;
+using TstInfo = foundation::Handle<TS_TST_INFO, TS_TST_INFO_free>;
 
 /// The library leaves its reasons in a queue of the thread; whatever is asked here leaves it as it was.
 class ErrorQueueMark {

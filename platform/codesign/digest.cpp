@@ -5,13 +5,11 @@
 #include <array>
 #include <new>
 
+#include "foundation/handle.h"
+
 namespace pinwell::codesign {
 
 namespace {
-
-struct ContextDeleter {
-    void operator()(EVP_MD_CTX* context) const noexcept { EVP_MD_CTX_free(context); }
-};
 
 const EVP_MD* algorithm(DigestType type) {
     switch (type) {
@@ -30,7 +28,7 @@ const EVP_MD* algorithm(DigestType type) {
 
 struct Hasher::State {
     DigestType type;
-    std::unique_ptr<EVP_MD_CTX, ContextDeleter> context;
+    foundation::Handle<EVP_MD_CTX, EVP_MD_CTX_free> context;
 };
 
 std::optional<DigestType> digestTypeNumbered(std::uint8_t number) {

@@ -10,6 +10,7 @@
 #include <memory>
 #include <optional>
 
+#include "foundation/handle.h"
 #include "foundation/property_list_guard.h"
 #include "foundation/utf8.h"
 
@@ -21,13 +22,10 @@ constexpr std::int64_t kLibraryEpoch = 978307200;
 
 constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
 
-struct FreeNode {
-    void operator()(plist_t node) const { plist_free(node); }
-};
 struct FreeMemory {
     void operator()(void* memory) const { std::free(memory); }  // NOLINT: allocated by the C library's malloc
 };
-using Node = std::unique_ptr<void, FreeNode>;
+using Node = Handle<void, plist_free>;
 using Iterator = std::unique_ptr<void, FreeMemory>;
 using Text = std::unique_ptr<char, FreeMemory>;
 

@@ -5,9 +5,9 @@
 #include <algorithm>
 #include <array>
 #include <cstring>
-#include <memory>
 #include <system_error>
 
+#include "foundation/handle.h"
 #include "https/redirect.h"
 #include "https/response_head.h"
 #include "https/server_trust.h"
@@ -18,17 +18,10 @@ namespace {
 
 using foundation::Result;
 
-template <auto Free>
-struct Deleter {
-    template <class T>
-    void operator()(T* object) const noexcept {
-        Free(object);
-    }
-};
-using EasyHandle = std::unique_ptr<CURL, Deleter<curl_easy_cleanup>>;
-using MultiHandle = std::unique_ptr<CURLM, Deleter<curl_multi_cleanup>>;
-using AddressHandle = std::unique_ptr<CURLU, Deleter<curl_url_cleanup>>;
-using HeaderListHandle = std::unique_ptr<curl_slist, Deleter<curl_slist_free_all>>;
+using EasyHandle = foundation::Handle<CURL, curl_easy_cleanup>;
+using MultiHandle = foundation::Handle<CURLM, curl_multi_cleanup>;
+using AddressHandle = foundation::Handle<CURLU, curl_url_cleanup>;
+using HeaderListHandle = foundation::Handle<curl_slist, curl_slist_free_all>;
 
 // Not before the first transfer: it costs start-up time, and most runs that fail never get here.
 bool libraryIsReady() {
@@ -48,7 +41,7 @@ struct Target {
 std::string partOf(CURLU* address, CURLUPart part, unsigned flags) {
     char* text = nullptr;
     if (curl_url_get(address, part, &text, flags) != CURLUE_OK) return {};
-    const std::unique_ptr<char, Deleter<curl_free>> owner(text);
+    const foundation::Handle<char, curl_free> owner(text);
     return text;
 }
 

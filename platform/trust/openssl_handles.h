@@ -8,21 +8,12 @@
 #include <openssl/x509.h>
 #include <openssl/x509v3.h>
 
-#include <memory>
-
 #include "foundation/bytes.h"
+#include "foundation/handle.h"
 
 namespace pinwell::trust {
 
-template <auto release>
-struct Releaser {
-    template <class T>
-    void operator()(T* object) const noexcept {
-        release(object);
-    }
-};
-template <class T, auto release>
-using Handle = std::unique_ptr<T, Releaser<release>>;
+using foundation::Handle;
 
 /// Leaves OpenSSL's error queue of this thread as it was found: a TLS session of the same thread reads that
 /// queue too, and would take our refusals for its own.

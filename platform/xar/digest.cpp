@@ -6,6 +6,8 @@
 #include <array>
 #include <new>
 
+#include "foundation/handle.h"
+
 namespace pinwell::xar {
 namespace {
 
@@ -66,10 +68,7 @@ std::size_t digestSize(DigestAlgorithm algorithm) {
 }
 
 struct Digest::Context {
-    struct Free {
-        void operator()(EVP_MD_CTX* context) const noexcept { EVP_MD_CTX_free(context); }
-    };
-    std::unique_ptr<EVP_MD_CTX, Free> handle{EVP_MD_CTX_new()};
+    foundation::Handle<EVP_MD_CTX, EVP_MD_CTX_free> handle{EVP_MD_CTX_new()};
     std::size_t size = 0;
 };
 

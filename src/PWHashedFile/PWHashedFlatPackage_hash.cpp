@@ -8,6 +8,7 @@
 #include <string_view>
 #include <type_traits>
 
+#include "foundation/handle.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "src/messages.h"
 
@@ -17,10 +18,7 @@ namespace {
 constexpr std::int32_t kReading = 0;
 constexpr std::string_view kSignatureType = "CMS";
 
-struct CloseArchive {
-    void operator()(xar_t archive) const noexcept { xar_close(archive); }
-};
-using Archive = std::unique_ptr<std::remove_pointer_t<xar_t>, CloseArchive>;
+using Archive = foundation::Handle<std::remove_pointer_t<xar_t>, xar_close>;
 
 struct Free {
     void operator()(std::uint8_t* bytes) const noexcept { std::free(bytes); }  // NOLINT(*-no-malloc)

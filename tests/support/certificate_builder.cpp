@@ -15,6 +15,7 @@
 #include <stdexcept>
 
 #include "foundation/byte_writer.h"
+#include "foundation/handle.h"
 
 namespace pinwell::test {
 namespace {
@@ -23,15 +24,7 @@ using foundation::ByteView;
 using foundation::ByteWriter;
 using foundation::Data;
 
-template <auto release>
-struct Releaser {
-    template <class T>
-    void operator()(T* object) const {
-        release(object);
-    }
-};
-template <class T, auto release>
-using Handle = std::unique_ptr<T, Releaser<release>>;
+using foundation::Handle;
 
 using BioHandle = Handle<BIO, BIO_free_all>;
 using CertificateHandle = Handle<X509, X509_free>;

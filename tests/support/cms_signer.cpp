@@ -7,33 +7,26 @@
 #include <openssl/ts.h>
 #include <openssl/x509.h>
 
-#include <memory>
 #include <stdexcept>
 
 #include "foundation/byte_writer.h"
+#include "foundation/handle.h"
 #include "support/code_directory_builder.h"
 
 namespace pinwell::test {
 
 namespace {
 
-template <auto free>
-struct Deleter {
-    template <class T>
-    void operator()(T* object) const noexcept {
-        free(object);
-    }
-};
-using Key = std::unique_ptr<EVP_PKEY, Deleter<EVP_PKEY_free>>;
-using Certificate = std::unique_ptr<X509, Deleter<X509_free>>;
-using Message = std::unique_ptr<CMS_ContentInfo, Deleter<CMS_ContentInfo_free>>;
-using Bio = std::unique_ptr<BIO, Deleter<BIO_free_all>>;
-using TstInfo = std::unique_ptr<TS_TST_INFO, Deleter<TS_TST_INFO_free>>;
-using Imprint = std::unique_ptr<TS_MSG_IMPRINT, Deleter<TS_MSG_IMPRINT_free>>;
-using Algorithm = std::unique_ptr<X509_ALGOR, Deleter<X509_ALGOR_free>>;
-using Integer = std::unique_ptr<ASN1_INTEGER, Deleter<ASN1_INTEGER_free>>;
-using Time = std::unique_ptr<ASN1_GENERALIZEDTIME, Deleter<ASN1_GENERALIZEDTIME_free>>;
-using Object = std::unique_ptr<ASN1_OBJECT, Deleter<ASN1_OBJECT_free>>;
+using Key = foundation::Handle<EVP_PKEY, EVP_PKEY_free>;
+using Certificate = foundation::Handle<X509, X509_free>;
+using Message = foundation::Handle<CMS_ContentInfo, CMS_ContentInfo_free>;
+using Bio = foundation::Handle<BIO, BIO_free_all>;
+using TstInfo = foundation::Handle<TS_TST_INFO, TS_TST_INFO_free>;
+using Imprint = foundation::Handle<TS_MSG_IMPRINT, TS_MSG_IMPRINT_free>;
+using Algorithm = foundation::Handle<X509_ALGOR, X509_ALGOR_free>;
+using Integer = foundation::Handle<ASN1_INTEGER, ASN1_INTEGER_free>;
+using Time = foundation::Handle<ASN1_GENERALIZEDTIME, ASN1_GENERALIZEDTIME_free>;
+using Object = foundation::Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
 
 void require(bool done, const char* what) {
     if (!done) throw std::runtime_error(std::string("cannot make a test signature: ") + what);

@@ -24,6 +24,7 @@
 #include <thread>
 
 #include "foundation/file_io.h"
+#include "foundation/handle.h"
 #include "support/certificate_builder.h"
 
 namespace pinwell::test {
@@ -37,18 +38,11 @@ constexpr std::size_t kMaximumEndless = std::size_t{256} << 20U;
 constexpr std::size_t kMaximumConnections = 256;
 constexpr std::chrono::seconds kPatience{60};
 
-template <auto Free>
-struct Deleter {
-    template <class T>
-    void operator()(T* object) const noexcept {
-        Free(object);
-    }
-};
-using ContextHandle = std::unique_ptr<SSL_CTX, Deleter<SSL_CTX_free>>;
-using ConnectionHandle = std::unique_ptr<SSL, Deleter<SSL_free>>;
-using CertificateHandle = std::unique_ptr<X509, Deleter<X509_free>>;
-using KeyHandle = std::unique_ptr<EVP_PKEY, Deleter<EVP_PKEY_free>>;
-using BioHandle = std::unique_ptr<BIO, Deleter<BIO_free>>;
+using ContextHandle = foundation::Handle<SSL_CTX, SSL_CTX_free>;
+using ConnectionHandle = foundation::Handle<SSL, SSL_free>;
+using CertificateHandle = foundation::Handle<X509, X509_free>;
+using KeyHandle = foundation::Handle<EVP_PKEY, EVP_PKEY_free>;
+using BioHandle = foundation::Handle<BIO, BIO_free>;
 
 void require(bool condition, const char* what) {
     if (!condition) throw std::runtime_error(std::string("hostile server: ") + what);

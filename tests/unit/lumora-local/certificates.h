@@ -7,24 +7,17 @@
 #include <openssl/x509_vfy.h>
 #include <openssl/x509v3.h>
 
-#include <memory>
 #include <string>
 
 #include "foundation/bytes.h"
+#include "foundation/handle.h"
 
 namespace pinwell::lumora::test {
 
-template <auto Free>
-struct Deleter {
-    template <class T>
-    void operator()(T* object) const {
-        Free(object);
-    }
-};
-using Bio = std::unique_ptr<BIO, Deleter<BIO_free_all>>;
-using Certificate = std::unique_ptr<X509, Deleter<X509_free>>;
-using Key = std::unique_ptr<EVP_PKEY, Deleter<EVP_PKEY_free>>;
-using Object = std::unique_ptr<ASN1_OBJECT, Deleter<ASN1_OBJECT_free>>;
+using Bio = foundation::Handle<BIO, BIO_free_all>;
+using Certificate = foundation::Handle<X509, X509_free>;
+using Key = foundation::Handle<EVP_PKEY, EVP_PKEY_free>;
+using Object = foundation::Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
 
 inline Certificate certificateFromPem(const std::string& pem) {
     const Bio bio(BIO_new_mem_buf(pem.data(), static_cast<int>(pem.size())));
