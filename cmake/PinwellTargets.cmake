@@ -15,10 +15,15 @@ function(pinwell_executable name)
 endfunction()
 
 # pinwell_test(NAME [WHOLE] [TIMEOUT SECONDS] SOURCES...): a GoogleTest program; every test in it is a ctest of its own,
-# or, with WHOLE, the program is one: for tables of many quick rows.
+# or, with WHOLE, the program is one: for tables of many quick rows. PINWELL_WHOLE_TESTS makes all of a folder so.
 function(pinwell_test name)
   cmake_parse_arguments(PARSE_ARGV 1 test "WHOLE" "TIMEOUT" "")
-  if(NOT test_TIMEOUT)
+  if(PINWELL_WHOLE_TESTS)
+    set(test_WHOLE TRUE)
+  endif()
+  if(NOT test_TIMEOUT AND test_WHOLE)
+    set(test_TIMEOUT 600)
+  elseif(NOT test_TIMEOUT)
     set(test_TIMEOUT 120)
   endif()
   add_executable(${name} ${test_UNPARSED_ARGUMENTS})
