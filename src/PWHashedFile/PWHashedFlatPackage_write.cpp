@@ -42,7 +42,8 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
     std::optional<URL> copy;
     try {
         const Data tail = tailWith(ticket);
-        copy = saveMovedTrailers(**opened, tail);
+        // A clone may be cut short: the original is still there.
+        if (target == fileURL()) copy = saveMovedTrailers(**opened, tail);
         writeTail(**opened, tail, targetName);
         if (copy) static_cast<void>(platform().files.removeItem(*copy));
     } catch (const files::FileHandleError& failure) {

@@ -315,6 +315,19 @@ TEST_F(FlatPackageWriting, NothingIsSavedWhereNoTrailerMoves) {
     EXPECT_EQ(platform.files.count("writeFile"), 0U);
 }
 
+TEST_F(FlatPackageWriting, NothingIsSavedWhereACloneIsWritten) {
+    const std::string before = PackageBuilder().terminator().ticket("OLD").unknown("one").build();
+    put(before);
+    const foundation::URL clone = platform.directory.url("clone.pkg");
+    test::writeFile(clone.path(), before);
+    package.ticketData();
+    EXPECT_TRUE(package._writeNewTicketDataFromURL(source, clone, false, nullptr));
+    EXPECT_EQ(platform.files.count("writeFile"), 0U);
+    EXPECT_EQ(test::readFile(clone.path()),
+              PackageBuilder().terminator().unknown("one").ticket("NEW TICKET").build());
+    EXPECT_EQ(contents(), before);
+}
+
 TEST_F(FlatPackageWriting, TrailersThatCannotBeSavedAreNotMoved) {
     const std::string before = PackageBuilder().terminator().ticket("OLD").unknown("one").build();
     put(before);
