@@ -1,12 +1,18 @@
 #include "support/replaced_allocation.h"
 
+#include <algorithm>
 #include <cstdlib>
 #include <new>
 
 namespace {
 
+void* allocate(std::size_t size) noexcept {
+    if (!pinwell::test::mayAllocate(size)) return nullptr;
+    return std::malloc(std::max<std::size_t>(size, 1));  // none of 0 bytes: malloc may answer that with null
+}
+
 void* allocateOrThrow(std::size_t size) {
-    void* block = pinwell::test::allocateBlock(size);
+    void* block = allocate(size);
     if (block == nullptr) throw std::bad_alloc();
     return block;
 }
@@ -20,10 +26,10 @@ void* operator new[](std::size_t size) {
     return allocateOrThrow(size);
 }
 void* operator new(std::size_t size, const std::nothrow_t&) noexcept {
-    return pinwell::test::allocateBlock(size);
+    return allocate(size);
 }
 void* operator new[](std::size_t size, const std::nothrow_t&) noexcept {
-    return pinwell::test::allocateBlock(size);
+    return allocate(size);
 }
 void operator delete(void* block) noexcept {
     std::free(block);
