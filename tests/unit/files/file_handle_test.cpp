@@ -1,11 +1,11 @@
 #include <fcntl.h>
-#include <sys/resource.h>
 #include <unistd.h>
 
 #include <csignal>
 #include <limits>
 
 #include "fixture.h"
+#include "support/file_size_limit.h"
 #include "support/volume.h"
 
 namespace pinwell::test {
@@ -133,13 +133,11 @@ TEST_F(Handle, ForReadingDoesNotWrite) {
 
 TEST_F(Handle, SaysWhyAWriteFailed) {
     const auto handle = updating("");
-    rlimit before{};
-    getrlimit(RLIMIT_FSIZE, &before);
-    const rlimit small{4096, before.rlim_max};
     std::signal(SIGXFSZ, SIG_IGN);
-    setrlimit(RLIMIT_FSIZE, &small);
-    const std::string reason = reasonOf([&] { handle->write(asBytes(irregularBytes(10'000))); });
-    setrlimit(RLIMIT_FSIZE, &before);
+    const std::string reason = [&] {
+        const FileSizeLimit limit(4096);
+        return reasonOf([&] { handle->write(asBytes(irregularBytes(10'000))); });
+    }();
     std::signal(SIGXFSZ, SIG_DFL);
     EXPECT_EQ(reason, "Cannot write to " + path("file") + ": File too large");
 }
@@ -167,15 +165,11 @@ TEST_F(Handle, ReservesNoRoomOnAFullVolume) {
 
 TEST_F(Handle, ReservesNoRoomOverTheFileSizeLimit) {
     const auto handle = updating("contents");
-    rlimit before{};
-    getrlimit(RLIMIT_FSIZE, &before);
-    const rlimit small{4096, before.rlim_max};
-    setrlimit(RLIMIT_FSIZE, &small);
+    const FileSizeLimit limit(4096);
     handle->reserve(4096);
     handle->seek(1);
-    const std::string reason = reasonOf([&] { handle->reserve(4096); });
-    setrlimit(RLIMIT_FSIZE, &before);
-    EXPECT_EQ(reason, "Cannot reserve room in " + path("file") + ": File too large");
+    EXPECT_EQ(reasonOf([&] { handle->reserve(4096); }),
+              "Cannot reserve room in " + path("file") + ": File too large");
 }
 
 TEST_F(Handle, ClosesOnceAndIsOfNoUseAfterwards) {
