@@ -287,7 +287,7 @@ TEST_F(ChangingFile, ThatLosesItsSignatureIsNoLongerVouchedFor) {
 
 TEST_F(ChangingFile, ThatBecomesAnotherKindCannotBeReadBack) {
     // Only its executable makes it a bundle.
-    const std::string generic = directory / "work/Sample";
+    const std::string generic = directory / "builds/Sample";
     std::filesystem::rename(bundle, generic);
     bundle = generic;
     EXPECT_THAT(stapleWhile([&] { std::filesystem::remove(bundle + "/Contents/Programs/Sample"); }),

@@ -1,7 +1,7 @@
 // Disk images and flat packages as files, with what a test needs to know about them: their bytes, the hash
 // that a ticket lists for them, and what they look like once a ticket is stapled to them.
 //
-//   const Artefact image = writeArtefact(signedImage(), directory / "work/Sample.dmg");
+//   const Artefact image = writeArtefact(signedImage(), directory / "builds/Sample.dmg");
 //   serveTicket(sealed(image.payload()));
 //   EXPECT_THAT(pinwell({"staple", image.path}), Ended(0, ...));
 //   EXPECT_EQ(readFile(image.path), image.stapledWith(ticket));

@@ -20,7 +20,7 @@ class FileArtefact : public EndToEndTest, public testing::WithParamInterface<Art
   protected:
     Artefact artefact = [this] {
         Artefact made = GetParam()(irregularData(kDataSize));
-        return writeArtefact(made, directory / ("work/" + made.name));
+        return writeArtefact(made, directory / ("builds/" + made.name));
     }();
 
     ProcessResult staple() const { return pinwell({"staple", artefact.path}); }
@@ -33,7 +33,7 @@ class FileArtefact : public EndToEndTest, public testing::WithParamInterface<Art
                " has been revoked. Tollmark will prevent it from running.";
     }
     testing::Matcher<const ProcessResult&> Worked() const {
-        return Ended(0, ElementsAre(processing(), processing(), "The staple and validate action worked!"));
+        return Ended(0, ElementsAre(processing(), processing(), kWorked));
     }
 
     Data ticketOf(const TicketPayloadBuilder& payload) const { return sealed(payload); }
@@ -50,7 +50,7 @@ class FileArtefact : public EndToEndTest, public testing::WithParamInterface<Art
             serveTicket(ticket);
             EXPECT_THAT(staple(), Worked());
             EXPECT_EQ(readFile(artefact.path), artefact.stapledWith(ticket));
-            EXPECT_THAT(validate(), Ended(0, ElementsAre(processing(), "The validate action worked!")));
+            EXPECT_THAT(validate(), Ended(0, ElementsAre(processing(), kValidated)));
         }
     }
 };
@@ -63,7 +63,7 @@ TEST_P(FileArtefact, StapledByHandIsValid) {
     const Data ticket = ticketOf(artefact.payload());
     serveTicket(ticket);
     writeFile(artefact.path, artefact.stapledWith(ticket));
-    EXPECT_THAT(validate(), Ended(0, ElementsAre(processing(), "The validate action worked!")));
+    EXPECT_THAT(validate(), Ended(0, ElementsAre(processing(), kValidated)));
 }
 
 TEST_P(FileArtefact, LeavesTheTicketAmongTheTemporaryFilesAndWhatAnImageCanBeRepairedWith) {
@@ -150,7 +150,7 @@ TEST_P(FileArtefact, ThatCarriesADamagedTicketIsPutRightByStaplingIt) {
     EXPECT_THAT(validate(), Ended(65, ElementsAre(processing())));
     EXPECT_THAT(staple(), Worked());
     EXPECT_EQ(readFile(artefact.path), artefact.stapledWith(ticket));
-    EXPECT_THAT(validate(), Ended(0, ElementsAre(processing(), "The validate action worked!")));
+    EXPECT_THAT(validate(), Ended(0, ElementsAre(processing(), kValidated)));
 }
 
 INSTANTIATE_TEST_SUITE_P(OfEveryKind, FileArtefact,
@@ -166,7 +166,7 @@ class Package : public EndToEndTest {
   protected:
     const ArchiveBuilder archive = ArchiveBuilder().signature("CMS").afterChecksum(irregularData(kDataSize));
     const Data ticket = sealed(TicketPayloadBuilder().entry(1, archive.rightChecksum()));
-    const std::string path = directory / "work/Sample.pkg";
+    const std::string path = directory / "builds/Sample.pkg";
 
     PackageBuilder package() const { return PackageBuilder().archive(archive.build()); }
     static std::string text(const Data& bytes) { return foundation::toString(bytes); }
@@ -176,10 +176,8 @@ class Package : public EndToEndTest {
         writeFile(path, package.build());
         serveTicket(ticket);
         const std::string processing = "Processing: " + path;
-        EXPECT_THAT(pinwell({"staple", path}),
-                    Ended(0, ElementsAre(processing, processing, "The staple and validate action worked!")));
-        EXPECT_THAT(pinwell({"validate", path}),
-                    Ended(0, ElementsAre(processing, "The validate action worked!")));
+        EXPECT_THAT(pinwell({"staple", path}), Ended(0, ElementsAre(processing, processing, kWorked)));
+        EXPECT_THAT(pinwell({"validate", path}), Ended(0, ElementsAre(processing, kValidated)));
         return readFile(path);
     }
 };

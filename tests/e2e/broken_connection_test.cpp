@@ -123,8 +123,7 @@ TEST_F(SlowServer, IsWaitedForAtEveryStep) {
         EXPECT_EQ(stapled(), std::nullopt);
         gate.open();
     }
-    EXPECT_THAT(run.wait(),
-                Ended(0, ElementsAre(processing(), processing(), "The staple and validate action worked!")));
+    EXPECT_THAT(run.wait(), Ended(0, ElementsAre(processing(), processing(), kWorked)));
 }
 
 }  // namespace

@@ -33,7 +33,7 @@ class Bundle : public EndToEndTest {
 TEST_F(Bundle, GetsExactlyTheBytesOfTheTicketAndValidatesFromThenOn) {
     EXPECT_THAT(staple(), Ended(0, ElementsAre(processing(), processing(), kWorked)));
     EXPECT_EQ(stapled(), genuine);
-    EXPECT_THAT(validate(), Ended(0, ElementsAre(processing(), "The validate action worked!")));
+    EXPECT_THAT(validate(), Ended(0, ElementsAre(processing(), kValidated)));
 }
 
 TEST_F(Bundle, ChangesInNothingButItsTicket) {
@@ -42,7 +42,7 @@ TEST_F(Bundle, ChangesInNothingButItsTicket) {
     ASSERT_EQ(staple().exitStatus, 0);
     EXPECT_EQ(readFile(bundle + "/Contents/Programs/Sample"), executable);
     EXPECT_EQ(readFile(bundle + "/Contents/Info.plist"), propertyList);
-    EXPECT_THAT(namesBelow(directory / "work"),
+    EXPECT_THAT(namesBelow(directory / "builds"),
                 ElementsAre("Sample.app", "Sample.app/Contents", "Sample.app/Contents/CodeResources",
                             "Sample.app/Contents/Info.plist", "Sample.app/Contents/Programs",
                             "Sample.app/Contents/Programs/Sample"));
@@ -68,7 +68,7 @@ TEST_F(Bundle, CanBeStapledAgainAndAgain) {
 }
 
 TEST_F(Bundle, ACompatibilityLinkIsLeftAlone) {
-    const std::string target = directory / "work/target";
+    const std::string target = directory / "builds/target";
     writeFile(target, std::string_view("precious"));
     std::filesystem::create_symlink(target, ticketPath());
     EXPECT_THAT(staple(), CouldNotBeWritten(bundle));
@@ -87,7 +87,7 @@ TEST_F(Bundle, ACompatibilityLinkThatLeadsNowhereIsLeftAlone) {
 }
 
 TEST_F(Bundle, ALinkToAGoodTicketIsNoTicket) {
-    const std::string target = directory / "work/target";
+    const std::string target = directory / "builds/target";
     writeFile(target, genuine);
     std::filesystem::create_symlink(target, ticketPath());
     EXPECT_THAT(validate(),
@@ -108,7 +108,7 @@ TEST_F(Bundle, AFifoInTheTicketsPlaceIsNeitherReadNorReplaced) {
 }
 
 TEST_F(Bundle, AFlatBundleHasNoPlaceForATicket) {
-    const std::string flat = directory / "work/Flat.app";
+    const std::string flat = directory / "builds/Flat.app";
     std::filesystem::create_directory(flat);
     std::filesystem::copy_file(bundle + "/Contents/Programs/Sample", flat + "/Flat");
     const std::string place = urlOf(flat + "/Contents/CodeResources");
@@ -120,7 +120,7 @@ TEST_F(Bundle, AFlatBundleHasNoPlaceForATicket) {
 }
 
 TEST_F(Bundle, APlainExecutableHasNoPlaceForATicket) {
-    const std::string tool = directory / "work/tool";
+    const std::string tool = directory / "builds/tool";
     std::filesystem::copy_file(bundle + "/Contents/Programs/Sample", tool);
     const std::string before = readFile(tool);
     EXPECT_THAT(pinwell({"staple", tool}), CouldNotBeWritten(tool));
@@ -143,7 +143,7 @@ TEST_F(Bundle, AnExistingTicketThatCannotBeRemovedStays) {
 }
 
 TEST_F(Bundle, MayHaveANameThatIsNoURLText) {
-    const std::string named = directory / "work/Zw\xc3\xb6lf % #?.app";
+    const std::string named = directory / "builds/Zw\xc3\xb6lf % #?.app";
     std::filesystem::rename(bundle, named);
     const ProcessResult result = stapleVerbosely(named);
     EXPECT_THAT(result, Ended(0, AllOf(Contains("Processing: " + named), Contains(kWorked))));
@@ -151,10 +151,10 @@ TEST_F(Bundle, MayHaveANameThatIsNoURLText) {
 }
 
 TEST_F(Bundle, ItsNameCannotDriveTheTerminal) {
-    const std::string named = directory / "work/\x1b[31m.app";
+    const std::string named = directory / "builds/\x1b[31m.app";
     std::filesystem::rename(bundle, named);
     EXPECT_THAT(pinwell({"validate", named}),
-                Ended(65, ElementsAre("Processing: " + (directory / "work/\\x1b[31m.app"),
+                Ended(65, ElementsAre("Processing: " + (directory / "builds/\\x1b[31m.app"),
                                       "\\x1b[31m.app does not have a ticket stapled to it.")));
 }
 

@@ -40,8 +40,7 @@ testing::Matcher<const ProcessResult&> RefusedWithUsage(const std::string& text 
 class CommandLine : public EndToEndTest {
   protected:
     CommandLine() { serveTicket(ticket()); }
-    std::string missing(const std::string& name = "missing") const { return directory / ("work/" + name); }
-    static constexpr const char* kWorked = "The staple and validate action worked!";
+    std::string missing(const std::string& name = "missing") const { return directory / ("builds/" + name); }
 };
 
 TEST_F(CommandLine, NoArgumentsAreAnsweredWithTheUsage) {
@@ -76,7 +75,7 @@ TEST_F(CommandLine, AWrongCommandWordAndAWrongOptionAreTwoUsageTexts) {
 }
 
 TEST_F(CommandLine, TheUsageNamesTheProgramAsItWasStarted) {
-    const std::string name = directory / "work/stamp-it";
+    const std::string name = directory / "builds/stamp-it";
     std::filesystem::create_symlink(PINWELL_PROGRAM, name);
     Command renamed = command({"staple"});
     renamed.executable = name;
@@ -84,7 +83,7 @@ TEST_F(CommandLine, TheUsageNamesTheProgramAsItWasStarted) {
 }
 
 TEST_F(CommandLine, AProgramNameWithControlCharactersIsEscapedInTheUsage) {
-    const std::string name = directory / "work/\x1b[31mred";
+    const std::string name = directory / "builds/\x1b[31mred";
     std::filesystem::create_symlink(PINWELL_PROGRAM, name);
     Command renamed = command({});
     renamed.executable = name;
@@ -96,7 +95,7 @@ TEST_F(CommandLine, HelpPrintsTheUsageAndTheRunGoesOn) {
     const ProcessResult result = pinwell({"validate", "--help", bundle});
     EXPECT_EQ(result.exitStatus, 0);
     EXPECT_EQ(result.errors, usage());
-    EXPECT_THAT(result.outputLines(), ElementsAre(processing(), "The validate action worked!"));
+    EXPECT_THAT(result.outputLines(), ElementsAre(processing(), kValidated));
 }
 
 TEST_F(CommandLine, EveryUnknownOptionPrintsTheUsageOnceAndTheRunGoesOn) {
@@ -163,7 +162,7 @@ TEST_F(CommandLine, BehindADoubleDashNothingIsAnOption) {
 }
 
 TEST_F(CommandLine, ARelativePathIsTakenFromTheCurrentDirectory) {
-    for (const char* path : {"Sample.app", "./Sample.app/", "../work//Sample.app"}) {
+    for (const char* path : {"Sample.app", "./Sample.app/", "../builds//Sample.app"}) {
         const ProcessResult result = pinwell({"staple", path});
         EXPECT_EQ(result.exitStatus, 0) << path;
         EXPECT_THAT(result.outputLines(), Contains(kWorked)) << path;

@@ -52,7 +52,7 @@ std::string assetRecord(const std::string& urlTemplate, std::size_t size) {
     return assetRecord(urlTemplate, std::to_string(size));
 }
 
-EndToEndTest::EndToEndTest() : bundle(directory / "work/Sample.app") {
+EndToEndTest::EndToEndTest() : bundle(directory / "builds/Sample.app") {
     const Data codeDirectory = CodeDirectoryBuilder().covers(2, emptyRequirements()).build();
     hash = codeHashOf(2, codeDirectory);
     BundleBuilder()
@@ -77,7 +77,7 @@ Command EndToEndTest::command(std::vector<std::string> arguments) const {
     return {.executable = PINWELL_PROGRAM,
             .arguments = std::move(arguments),
             .environment = environment,
-            .workingDirectory = directory / "work"};
+            .workingDirectory = directory / "builds"};
 }
 
 ProcessResult EndToEndTest::pinwell(std::vector<std::string> arguments) const {

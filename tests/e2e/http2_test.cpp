@@ -82,8 +82,7 @@ TEST_F(HTTP2, IsSpoken) {
     ASSERT_LT(body.size(), 16384U);
     http2Service().enqueue(afterTheRequest().send(
         settings() + head(kStatus200 + field("x-ostrel-request-uuid", "TWO")) + lastData(body)));
-    EXPECT_THAT(staple(),
-                Ended(0, ElementsAre(processing(), processing(), "The staple and validate action worked!")));
+    EXPECT_THAT(staple(), Ended(0, ElementsAre(processing(), processing(), kWorked)));
     EXPECT_EQ(service().requests().at(0).method, "PRI");
     EXPECT_THAT(temporaryFiles(), ElementsAre("TWO.ticket"));
 }

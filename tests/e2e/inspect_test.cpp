@@ -37,7 +37,7 @@ class Inspect : public EndToEndTest {
         std::vector<std::string> paths{bundle};
         if (stapled) stapleByHand(ticket());
         for (const Artefact& one : {signedImage(), unsignedImage(), signedPackage()}) {
-            paths.push_back(directory / ("work/" + one.name));
+            paths.push_back(directory / ("builds/" + one.name));
             writeFile(paths.back(), stapled ? one.stapledWith(sealed(one.payload())) : one.contents);
         }
         return paths;
@@ -45,7 +45,7 @@ class Inspect : public EndToEndTest {
 
     /// Another program's word for that the object keeps to the schema.
     void expectValid(const std::string& json) const {
-        const std::string file = directory / "work/object.json";
+        const std::string file = directory / "builds/object.json";
         writeFile(file, json);
         const ProcessResult result =
             runProcess({.executable = JSONSCHEMA_PROGRAM,
@@ -57,7 +57,7 @@ class Inspect : public EndToEndTest {
 
 TEST_F(Inspect, IsContentWithWhatTheToolHasStapled) {
     for (const Artefact& one : {signedImage(), unsignedImage(), signedPackage()}) {
-        const Artefact written = writeArtefact(one, directory / ("work/" + one.name));
+        const Artefact written = writeArtefact(one, directory / ("builds/" + one.name));
         serveTicket(sealed(written.payload()));
         ASSERT_EQ(pinwell({"staple", written.path}).exitStatus, 0);
         EXPECT_THAT(inspect({written.path}),
@@ -83,16 +83,16 @@ TEST_F(Inspect, EndsWith65WithoutAGoodTicket) {
 }
 
 TEST_F(Inspect, EndsWith66ForWhatCannotBeInspected) {
-    EXPECT_THAT(inspect({directory / "work/missing"}),
+    EXPECT_THAT(inspect({directory / "builds/missing"}),
                 Ended(66, Contains(StartsWith("  The path cannot be read"))));
-    EXPECT_THAT(inspect({directory / "work"}),
+    EXPECT_THAT(inspect({directory / "builds"}),
                 Ended(66, Contains("  This is nothing that carries a ticket.")));
 }
 
 TEST_F(Inspect, OfSeveralPathsTheWorstDecides) {
     stapleByHand(ticket());
-    const Artefact image = writeArtefact(signedImage(), directory / "work/Signed.dmg");
-    const std::string missing = directory / "work/missing";
+    const Artefact image = writeArtefact(signedImage(), directory / "builds/Signed.dmg");
+    const std::string missing = directory / "builds/missing";
     EXPECT_EQ(inspect({bundle, bundle}).exitStatus, 0);
     EXPECT_EQ(inspect({image.path, bundle}).exitStatus, 65);
     EXPECT_EQ(inspect({missing, image.path, bundle}).exitStatus, 66);
@@ -163,15 +163,15 @@ TEST_F(Inspect, ShowsTheRestOfADamagedTicket) {
 TEST_F(Inspect, JsonKeepsToItsSchemaOnEveryOutcome) {
     std::vector<std::string> paths = artefacts(true);
     paths.push_back(ticketPath());
-    paths.push_back(directory / "work/missing");
-    paths.push_back(directory / "work");
+    paths.push_back(directory / "builds/missing");
+    paths.push_back(directory / "builds");
     Data damaged = ticketForOthers();
     damaged[9] ^= std::byte{1};
-    paths.push_back(directory / "work/damaged.ticket");
+    paths.push_back(directory / "builds/damaged.ticket");
     writeFile(paths.back(), damaged);
-    paths.push_back(directory / "work/short.ticket");
+    paths.push_back(directory / "builds/short.ticket");
     writeFile(paths.back(), "s8ch");
-    paths.push_back(directory / "work/Not.dmg");
+    paths.push_back(directory / "builds/Not.dmg");
     writeFile(paths.back(), std::string(700, 'x'));
     std::vector<std::string> arguments = paths;
     arguments.insert(arguments.begin(), "--json");
@@ -182,7 +182,7 @@ TEST_F(Inspect, JsonKeepsToItsSchemaOnEveryOutcome) {
 }
 
 TEST_F(Inspect, TheSchemaRefusesWhatIsNoSuchObject) {
-    const std::string file = directory / "work/object.json";
+    const std::string file = directory / "builds/object.json";
     writeFile(file, R"({"format":"pinwell-inspect","version":1})");
     const ProcessResult result =
         runProcess({.executable = JSONSCHEMA_PROGRAM, .arguments = {"-i", file, INSPECT_SCHEMA}});

@@ -17,7 +17,7 @@ using testing::StartsWith;
 /// The ordinary run has a service that would answer; none of these paths gets that far.
 class Kind : public EndToEndTest {
   protected:
-    std::string path(const std::string& name) const { return directory / ("work/" + name); }
+    std::string path(const std::string& name) const { return directory / ("builds/" + name); }
 
     void expectIncapable(const std::string& name, const std::string& noun) const {
         for (const char* word : {"staple", "validate"}) {

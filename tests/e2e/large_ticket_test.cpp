@@ -1,10 +1,9 @@
 // Tickets that are delivered as a file of their own.
-#include <sys/resource.h>
-
 #include <csignal>
 #include <filesystem>
 
 #include "fixture.h"
+#include "support/file_size_limit.h"
 
 namespace pinwell::test {
 namespace {
@@ -65,7 +64,7 @@ TEST_F(LargeTicket, SaysWhatItFetchesInVerboseMode) {
 TEST_F(LargeTicket, CompletesAValidation) {
     stapleByHand(genuine);
     serveAsset(ticket());
-    EXPECT_THAT(validate(), Ended(0, ElementsAre(processing(), "The validate action worked!")));
+    EXPECT_THAT(validate(), Ended(0, ElementsAre(processing(), kValidated)));
     EXPECT_EQ(stapled(), genuine);
 }
 
@@ -238,13 +237,10 @@ TEST_F(LargeTicket, ATemporaryDirectoryThatIsNotThereParksTheRun) {
 
 TEST_F(LargeTicket, ADownloadThatCannotBeKeptParksTheRunAndNoSignalEndsIt) {
     serveAsset(genuine);
-    rlimit before{};
-    ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &before), 0);
-    // Inherited by the tool, as a full disk would be by both.
-    const rlimit small{genuine.size() - 1, before.rlim_max};
-    ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &small), 0);
-    expectParked(DownloadFailed("could not be written"));
-    ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &before), 0);
+    {
+        const FileSizeLimit limit(genuine.size() - 1);
+        expectParked(DownloadFailed("could not be written"));
+    }
     EXPECT_THAT(temporaryFiles(), IsEmpty());
 }
 

@@ -89,7 +89,7 @@ TEST_F(LocalService, IssuesForSeveralArtefactsAtOnce) {
     for (const char* identifier : {"com.example.one", "com.example.two"}) {
         const Data directoryBlob =
             CodeDirectoryBuilder().identifier(identifier).covers(2, emptyRequirements()).build();
-        bundles.push_back(directory / ("work/" + std::string(identifier) + ".app"));
+        bundles.push_back(directory / ("builds/" + std::string(identifier) + ".app"));
         BundleBuilder()
             .executable(
                 ExecutableImageBuilder().signature(SuperBlobBuilder::adHoc(directoryBlob).build()).build())
@@ -110,7 +110,7 @@ TEST_F(LocalService, IssuesForSeveralArtefactsAtOnce) {
 }
 
 TEST_F(LocalService, IssuesForAPlainExecutableThatHasNoPlaceForTheTicket) {
-    const std::string tool = directory / "work/tool";
+    const std::string tool = directory / "builds/tool";
     std::filesystem::copy_file(bundle + "/Contents/Programs/Sample", tool);
     record("issue", {bundle});
     serveRecords();

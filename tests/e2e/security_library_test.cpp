@@ -15,7 +15,7 @@ class SecurityLibrary : public EndToEndTest {
         return staple();
     }
     testing::Matcher<const ProcessResult&> Worked() const {
-        return Ended(0, ElementsAre(processing(), processing(), "The staple and validate action worked!"));
+        return Ended(0, ElementsAre(processing(), processing(), kWorked));
     }
     testing::Matcher<const ProcessResult&> Refused() const {
         return Ended(65,

@@ -98,8 +98,7 @@ TEST_F(Signature, AScriptsBundleKeepsItsSignatureInFilesOfTheirOwn) {
         .separateSignature(codeDirectory, emptyRequirements(), {})
         .write(bundle);
     serveTicket(ticket());
-    EXPECT_THAT(staple(),
-                Ended(0, ElementsAre(processing(), processing(), "The staple and validate action worked!")));
+    EXPECT_THAT(staple(), Ended(0, ElementsAre(processing(), processing(), kWorked)));
 }
 
 TEST_F(Signature, AnIdentifierCannotDriveTheTerminal) {

@@ -109,7 +109,7 @@ class Volumes : public EndToEndTest, public testing::WithParamInterface<std::tup
     }
     testing::Matcher<const ProcessResult&> Worked() const {
         const std::string processing = "Processing: " + artefact.path;
-        return Ended(0, ElementsAre(processing, processing, "The staple and validate action worked!"));
+        return Ended(0, ElementsAre(processing, processing, kWorked));
     }
     testing::Matcher<const ProcessResult&> FailedToWrite() const {
         return Ended(73, ElementsAre("Processing: " + artefact.path, stapleFailed(73)));
@@ -163,14 +163,14 @@ TEST_P(Volumes, TakeAnotherTicketInPlaceOfTheFirst) {
     ASSERT_THAT(stapleArtefact(), Worked());
     EXPECT_EQ(readFile(artefact.path), artefact.stapledWith(ticket));
     EXPECT_THAT(names(), ElementsAre(artefact.name));
-    EXPECT_THAT(validateArtefact(), Ended(0, Contains("The validate action worked!")));
+    EXPECT_THAT(validateArtefact(), Ended(0, Contains(kValidated)));
 }
 
 TEST_P(Volumes, AreNotWrittenToByAValidation) {
     writeFile(artefact.path, artefact.stapledWith(ticket));
     serveTicket(ticket);
     ASSERT_EQ(mount(nullptr, volume.path().c_str(), nullptr, MS_REMOUNT | MS_RDONLY, nullptr), 0);
-    EXPECT_THAT(validateArtefact(), Ended(0, Contains("The validate action worked!")));
+    EXPECT_THAT(validateArtefact(), Ended(0, Contains(kValidated)));
     EXPECT_THAT(names(), ElementsAre(artefact.name));
 }
 

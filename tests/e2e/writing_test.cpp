@@ -38,7 +38,7 @@ class SharedArtefact : public EndToEndTest, public testing::WithParamInterface<A
 
     Artefact artefact = [this] {
         Artefact made = GetParam()(irregularData(100'000));
-        return writeArtefact(made, directory / ("work/" + made.name));
+        return writeArtefact(made, directory / ("builds/" + made.name));
     }();
     const Data ticket = sealed(artefact.payload());
 };
@@ -71,8 +71,7 @@ TEST_P(SharedArtefact, IsStapledByOneAfterTheOther) {
         staples.push_back(std::make_unique<RunningProcess>(command({"staple", artefact.path})));
     const std::string processing = "Processing: " + artefact.path;
     for (const auto& staple : staples)
-        EXPECT_THAT(staple->wait(),
-                    Ended(0, ElementsAre(processing, processing, "The staple and validate action worked!")));
+        EXPECT_THAT(staple->wait(), Ended(0, ElementsAre(processing, processing, kWorked)));
     EXPECT_EQ(readFile(artefact.path), artefact.stapledWith(ticket));
 }
 

@@ -5,7 +5,6 @@
 #include <linux/fs.h>
 #include <sys/ioctl.h>
 #include <sys/mount.h>
-#include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/sysmacros.h>
@@ -20,6 +19,7 @@
 #include "e2e/fixture.h"
 #include "foundation/file_io.h"
 #include "support/disk_image_builder.h"
+#include "support/file_size_limit.h"
 #include "support/volume.h"
 
 namespace pinwell::test {
@@ -32,7 +32,7 @@ using testing::StartsWith;
 
 class OddArtefact : public EndToEndTest {
   protected:
-    std::string path(std::string_view name) const { return directory / ("work/" + std::string(name)); }
+    std::string path(std::string_view name) const { return directory / ("builds/" + std::string(name)); }
 
     /// Both operations end so, and say so.
     void expectBoth(const std::string& item, int status,
@@ -73,7 +73,7 @@ TEST_F(OddArtefact, ALinkIsNotFollowed) {
 }
 
 TEST_F(OddArtefact, ADirectoryOnTheWayMayBeALink) {
-    std::filesystem::create_directory_symlink("../work", path("link"));
+    std::filesystem::create_directory_symlink("../builds", path("link"));
     const Artefact image = writeArtefact(signedImage(), path("Image.dmg"));
     const Data served = sealed(image.payload());
     serveTicket(served);
@@ -272,13 +272,10 @@ TEST_P(Unwritable, AFullVolumeKeepsTheFileAsItIs) {
 
 TEST_P(Unwritable, AFileOverTheSizeLimitStaysAsItIsAndNoSignalEndsTheRun) {
     const Artefact artefact = put(path(made.name));
-    rlimit before{};
-    ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &before), 0);
-    // Inherited by the tool; this process writes nothing meanwhile but what is smaller.
-    const rlimit small{artefact.contents.size(), before.rlim_max};
-    ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &small), 0);
-    const ProcessResult result = pinwell({"staple", artefact.path});
-    ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &before), 0);
+    const ProcessResult result = [&] {
+        const FileSizeLimit limit(artefact.contents.size());
+        return pinwell({"staple", artefact.path});
+    }();
     EXPECT_THAT(result, Ended(73, ElementsAre("Processing: " + artefact.path, stapleFailed(73))));
     EXPECT_TRUE(readFile(artefact.path) == artefact.contents);
 }
@@ -302,7 +299,7 @@ TEST_P(Unwritable, OrNotAFileMayHaveAnyName) {
 
 TEST_P(Unwritable, APathOverTheLimitDoesNotExist) {
     const std::string place = path(made.name);
-    std::string longer = directory / "work/";
+    std::string longer = directory / "builds/";
     while (longer.size() <= PATH_MAX) longer += "./";
     expectBoth(longer + made.name, 66, ElementsAre(StartsWith("File ")));
     expectBoth(place + std::string(NAME_MAX, 'n'), 66, ElementsAre(StartsWith("File ")));

@@ -2,11 +2,10 @@
 
 #include <gtest/gtest.h>
 
-#include <sstream>
-
 #include "codesign/code_error.h"
 #include "foundation/byte_reader.h"
 #include "foundation/byte_writer.h"
+#include "foundation/format.h"
 #include "support/code_directory_builder.h"
 
 namespace pinwell::test {
@@ -75,11 +74,7 @@ TEST_P(CodeDirectoryVersion, IsReadWithItsOwnHeader) {
 INSTANTIATE_TEST_SUITE_P(Accepted, CodeDirectoryVersion,
                          ::testing::Values(0x20001U, 0x200FFU, 0x20100U, 0x20200U, 0x20300U, 0x20400U,
                                            0x20500U, 0x20600U, 0x2FFFFU),
-                         [](const auto& version) {
-                             std::ostringstream name;
-                             name << "Version" << std::hex << std::uppercase << version.param;
-                             return name.str();
-                         });
+                         [](const auto& version) { return foundation::format("Version%X", version.param); });
 
 TEST(CodeDirectory, RefusesVersionsOutsideItsRange) {
     expectRefused(CodeDirectoryBuilder().version(0x20000));
