@@ -2,7 +2,6 @@
 
 #include <openssl/bio.h>
 #include <openssl/cms.h>
-#include <openssl/err.h>
 #include <openssl/evp.h>
 #include <openssl/ts.h>
 
@@ -11,12 +10,15 @@
 #include <chrono>
 #include <ctime>
 
-#include "foundation/handle.h"
+#include "trust/openssl.h"
 
 namespace pinwell::codesign {
 
 using foundation::ByteView;
 using foundation::Date;
+using trust::byteView;
+using trust::ErrorQueueGuard;
+using trust::unsignedBytes;
 
 namespace {
 
@@ -24,30 +26,12 @@ using Message = foundation::Handle<CMS_ContentInfo, CMS_ContentInfo_free>;
 using Bio = foundation::Handle<BIO, BIO_free_all>;
 using TstInfo = foundation::Handle<TS_TST_INFO, TS_TST_INFO_free>;
 
-/// The library leaves its reasons in a queue of the thread; whatever is asked here leaves it as it was.
-class ErrorQueueMark {
-  public:
-    ErrorQueueMark() { ERR_set_mark(); }
-    ~ErrorQueueMark() { ERR_pop_to_mark(); }
-    ErrorQueueMark(const ErrorQueueMark&) = delete;
-    ErrorQueueMark& operator=(const ErrorQueueMark&) = delete;
-};
-
-const unsigned char* start(ByteView bytes) {
-    return static_cast<const unsigned char*>(static_cast<const void*>(bytes.data()));
-}
-
-ByteView viewOf(const ASN1_STRING* string) {
-    const auto length = static_cast<std::size_t>(ASN1_STRING_length(string));
-    return std::as_bytes(std::span<const unsigned char>(ASN1_STRING_get0_data(string), length));
-}
-
 /// A SignedData that fills `bytes`; nothing otherwise.
 Message parseSignedData(ByteView bytes) {
     if (bytes.empty() || bytes.size() > kMaximumCmsLength) return nullptr;
-    const unsigned char* cursor = start(bytes);
+    const unsigned char* cursor = unsignedBytes(bytes);
     Message message(d2i_CMS_ContentInfo(nullptr, &cursor, static_cast<long>(bytes.size())));
-    if (!message || cursor != start(bytes) + bytes.size()) return nullptr;
+    if (!message || cursor != unsignedBytes(bytes) + bytes.size()) return nullptr;
     if (OBJ_obj2nid(CMS_get0_type(message.get())) != NID_pkcs7_signed) return nullptr;
     return message;
 }
@@ -70,7 +54,7 @@ bool imprintMatches(TS_MSG_IMPRINT* imprint, ByteView bytes) {
     unsigned length = 0;
     if (EVP_Digest(bytes.data(), bytes.size(), value.data(), &length, digest, nullptr) != 1) return false;
     const ByteView computed = std::as_bytes(std::span(value)).first(length);
-    const ByteView stated = viewOf(TS_MSG_IMPRINT_get_msg(imprint));
+    const ByteView stated = byteView(TS_MSG_IMPRINT_get_msg(imprint));
     return std::equal(computed.begin(), computed.end(), stated.begin(), stated.end());
 }
 
@@ -92,17 +76,17 @@ TstInfo verifiedTokenContent(ByteView token) {
     if (OBJ_obj2nid(CMS_get0_eContentType(message.get())) != NID_id_smime_ct_TSTInfo) return nullptr;
     if (CMS_is_detached(message.get()) != 0) return nullptr;
     if (CMS_verify(message.get(), nullptr, nullptr, nullptr, nullptr, kVerifyFlags) != 1) return nullptr;
-    const ByteView content = viewOf(*CMS_get0_content(message.get()));
-    const unsigned char* cursor = start(content);
+    const ByteView content = byteView(*CMS_get0_content(message.get()));
+    const unsigned char* cursor = unsignedBytes(content);
     TstInfo info(d2i_TS_TST_INFO(nullptr, &cursor, static_cast<long>(content.size())));
-    if (!info || cursor != start(content) + content.size()) return nullptr;
+    if (!info || cursor != unsignedBytes(content) + content.size()) return nullptr;
     return info;
 }
 
 }  // namespace
 
 bool verifyDetachedCms(ByteView cms, ByteView content) {
-    const ErrorQueueMark mark;
+    const ErrorQueueGuard guard;
     const Message message = parseSignedData(cms);
     if (!message || firstSigner(message) == nullptr) return false;
     if (CMS_is_detached(message.get()) != 1) return false;
@@ -111,7 +95,7 @@ bool verifyDetachedCms(ByteView cms, ByteView content) {
 }
 
 std::optional<Date> secureTimestamp(ByteView cms) {
-    const ErrorQueueMark mark;
+    const ErrorQueueGuard guard;
     const Message message = parseSignedData(cms);
     CMS_SignerInfo* signer = message ? firstSigner(message) : nullptr;
     if (signer == nullptr) return std::nullopt;
@@ -119,9 +103,9 @@ std::optional<Date> secureTimestamp(ByteView cms) {
     const void* attribute = CMS_unsigned_get0_data_by_OBJ(signer, OBJ_nid2obj(NID_id_smime_aa_timeStampToken),
                                                           -3, V_ASN1_SEQUENCE);
     if (attribute == nullptr) return std::nullopt;
-    const TstInfo info = verifiedTokenContent(viewOf(static_cast<const ASN1_STRING*>(attribute)));
+    const TstInfo info = verifiedTokenContent(byteView(static_cast<const ASN1_STRING*>(attribute)));
     if (!info) return std::nullopt;
-    const ByteView signature = viewOf(CMS_SignerInfo_get0_signature(signer));
+    const ByteView signature = byteView(CMS_SignerInfo_get0_signature(signer));
     if (!imprintMatches(TS_TST_INFO_get_msg_imprint(info.get()), signature)) return std::nullopt;
     return dateFrom(TS_TST_INFO_get_time(info.get()));
 }

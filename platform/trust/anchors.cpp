@@ -5,7 +5,7 @@
 #include <algorithm>
 #include <string_view>
 
-#include "trust/openssl_handles.h"
+#include "trust/openssl.h"
 
 namespace pinwell::trust {
 namespace {

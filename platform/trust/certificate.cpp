@@ -7,7 +7,7 @@
 
 #include "foundation/description.h"
 #include "trust/der.h"
-#include "trust/openssl_handles.h"
+#include "trust/openssl.h"
 
 namespace pinwell::trust {
 namespace {

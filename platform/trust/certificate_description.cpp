@@ -4,7 +4,7 @@
 #include <array>
 
 #include "trust/certificate.h"
-#include "trust/openssl_handles.h"
+#include "trust/openssl.h"
 
 namespace pinwell::trust {
 namespace {

@@ -4,7 +4,7 @@
 
 #include "foundation/byte_reader.h"
 #include "trust/der.h"
-#include "trust/openssl_handles.h"
+#include "trust/openssl.h"
 
 namespace pinwell::trust {
 namespace {

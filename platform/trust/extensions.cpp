@@ -5,7 +5,7 @@
 #include <set>
 
 #include "trust/der.h"
-#include "trust/openssl_handles.h"
+#include "trust/openssl.h"
 
 namespace pinwell::trust {
 namespace {

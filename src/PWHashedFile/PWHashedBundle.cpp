@@ -31,27 +31,22 @@ bool PWHashedBundle::writeNewTicketDataFromURL(const URL& source, ErrorOut error
     const foundation::SignalDeferral uninterrupted;
     files::FileManager& files = platform().files;
     const URL ticket = codeResourcesURL();
-    const auto fail = [&](std::optional<Error> reason) {
-        setAppropriateExitCode(kExitCannotCreate);
-        if (error != nullptr) *error = std::move(reason);
-        return false;
-    };
 
     if (const auto isRegular = files.isRegularFile(ticket); isRegular && !*isRegular) {
         NoisyLog("%@ will not replace the compatibility symlink at %@. Please remove it manually",
                  foundation::processName(), ticket);
-        return fail(std::nullopt);
+        return failedToWrite(std::nullopt, error);
     }
     // The bytes alone: the source is a private temporary file, the ticket is read by whoever gets the bundle.
     if (!files.copyContents(source, ticket)) {
         if (const auto removed = files.removeItem(ticket); !removed) {
             NoisyLog("Could not remove existing ticket from %@ because an error occurred. %@", ticket,
                      removed.error());
-            return fail(removed.error());
+            return failedToWrite(removed.error(), error);
         }
         if (const auto copied = files.copyContents(source, ticket); !copied) {
             NoisyLog("Could not save ticket to %@ because an error occurred. %@", ticket, copied.error());
-            return fail(copied.error());
+            return failedToWrite(copied.error(), error);
         }
     }
     setAppropriateExitCode(kExitOK);

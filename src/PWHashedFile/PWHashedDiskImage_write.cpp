@@ -15,27 +15,22 @@ bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& sou
                                                    bool deleteExisting, ErrorOut error) {
     const std::string name = target.lastPathComponent();
     std::optional<Error> held;
-    const auto fail = [&] {
-        setAppropriateExitCode(kExitCannotCreate);
-        if (error != nullptr) *error = held;
-        return false;
-    };
 
     // Empty when one is deleted, and behind the next check only then.
     const Data ticket = deleteExisting ? Data{} : readTicket(source, held);
     const bool fitsABlob = !ticket.empty() && ticket.size() <= std::numeric_limits<std::uint32_t>::max();
     if (!deleteExisting && !fitsABlob) {
         NoisyLog("Cannot add a new ticket to %@. %@", name, held);
-        return fail();
+        return failedToWrite(held, error);
     }
     if (deleteExisting && !ticketData()) {
         NoisyLog("Cannot delete an existing ticket in %@ that doesn't exist.", name);
-        return fail();
+        return failedToWrite(held, error);
     }
 
     Data superblob = superblobWithTicket(signature_.blobs, ticket);
     if (!superblob.empty() && !writeSignature(std::move(superblob), target, deleteExisting, held))
-        return fail();
+        return failedToWrite(held, error);
     setAppropriateExitCode(kExitOK);
     return true;
 }

@@ -94,6 +94,12 @@ Data PWHashedFile::readTicket(const std::optional<URL>& source, std::optional<Er
     return {};
 }
 
+bool PWHashedFile::failedToWrite(std::optional<Error> reason, ErrorOut error) {
+    setAppropriateExitCode(kExitCannotCreate);
+    if (error != nullptr) *error = std::move(reason);
+    return false;
+}
+
 void PWHashedFile::noteState() {
     if (!stateWhenRead_) stateWhenRead_ = platform_.files.stateOfItem(*fileURL_);
 }

@@ -107,6 +107,9 @@ class PWHashedFile {
     /// failed.
     Data readTicket(const std::optional<URL>& source, std::optional<Error>& held) const;
 
+    /// How a failed write ends: exit code 73, and the reason handed out, where there is one. Always false.
+    bool failedToWrite(std::optional<Error> reason, ErrorOut error);
+
     /// Remembers what state the file is in, the first time only. A kind calls it before it reads what its
     /// write will go by; without it, every state is good enough to be written to.
     void noteState();

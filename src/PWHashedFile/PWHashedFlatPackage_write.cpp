@@ -14,30 +14,25 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
                                                      bool deleteExisting, ErrorOut error) {
     const std::string targetName = target.lastPathComponent();
     std::optional<Error> held;
-    const auto fail = [&] {
-        setAppropriateExitCode(kExitCannotCreate);
-        if (error != nullptr) *error = held;
-        return false;
-    };
 
     // Empty when one is deleted, and behind the next check only then.
     const Data ticket = deleteExisting ? Data{} : readTicket(source, held);
     if (!deleteExisting && !isWritableTicketLength(ticket.size())) {
         NoisyLog("Cannot add a new ticket to %@. %@", targetName, held);
-        return fail();
+        return failedToWrite(held, error);
     }
     const bool hasTicket =
         ticketData().has_value();  // the question reads the trailers, on which all below rests
     if (deleteExisting && !hasTicket) {
         NoisyLog("Cannot delete an existing ticket in %@ that doesn't exist.", targetName);
-        return fail();
+        return failedToWrite(held, error);
     }
 
     const auto opened = platform().files.openForUpdating(target);
     if (!opened) {
         held = opened.error();
         NoisyLog("Could not create file handle to %@. %@", target.path(), held);
-        return fail();
+        return failedToWrite(held, error);
     }
     std::optional<URL> copy;
     try {
@@ -50,7 +45,7 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
         if (copy) NoisyLog("The trailers of %@ are kept in %@.", targetName, copy->path());
         NoisyLog("Fatal error while %@ ticket to %@. %@.",
                  deleteExisting ? "deleting existing" : "writing new", target.path(), failure.what());
-        return fail();
+        return failedToWrite(held, error);
     }
     setAppropriateExitCode(kExitOK);
     return true;

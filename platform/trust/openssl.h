@@ -1,4 +1,4 @@
-// Owning handles of OpenSSL objects. For the .cpp files of this folder only.
+// What the .cpp files that speak to OpenSSL share, here and in codesign. Nothing of it belongs in a header.
 #pragma once
 
 #include <openssl/asn1.h>
