@@ -4,6 +4,8 @@
 #   build TARGET...    builds the programs, optimised
 #   start_service      starts a record service and points PINWELL_PLATFORM at it; sets $url
 #   forget FILE        drops the file from the page cache
+#
+# shellcheck disable=SC2034  # what it sets, those that source it use
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.."
 bin=$PWD/build/release/bin

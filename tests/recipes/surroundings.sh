@@ -7,10 +7,11 @@
 # surroundings are in it: release/ with a sample of every kind, and staple-and-validate, off the page as well.
 # shellcheck shell=bash
 set -euo pipefail
+# shellcheck source=../support/outcomes.bash
+. "$(dirname "${BASH_SOURCE[0]}")/../support/outcomes.bash"
 
 programs=$1 page=$2
 recipes=$(cd "$(dirname "${BASH_SOURCE[0]}")" && pwd)
-skipped=125
 service=
 background=  # a process group
 
@@ -35,14 +36,6 @@ export LC_ALL=C HOME=$work/home TMPDIR=$work/tmp PATH=$programs:$PATH
 mkdir "$HOME" "$TMPDIR"
 cd "$work"
 
-fail() {
-  echo "FAILED: $*"
-  exit 1
-}
-skip() {
-  echo "skipped: $*"
-  exit $skipped
-}
 expect_equal() { # WHAT WANTED GOT
   [ "$2" = "$3" ] || fail "$1: expected '$2', got '$3'"
 }

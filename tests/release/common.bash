@@ -1,15 +1,7 @@
 # What the tests in this folder share. Sourced by each, after `set -euo pipefail`.
 
-fail() {
-  echo "FAILED: $*" >&2
-  exit 1
-}
-
-# A test that cannot run here says why and ends with 77, which ctest reports as skipped.
-skip() {
-  echo "SKIPPED: $*"
-  exit 77
-}
+# shellcheck source=../support/outcomes.bash
+. "$(dirname "${BASH_SOURCE[0]}")/../support/outcomes.bash"
 
 # The long and short options in a program's help, one a line. They stand at the left of the table of options.
 options_in_help() {
