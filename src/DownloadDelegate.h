@@ -1,9 +1,9 @@
 // The controller of one run: looks the ticket up, judges the server and the ticket, staples it, and reports.
 //
-// Made once by main and kept for the whole run. grabTicket runs on the main thread; the callbacks run on the
-// serial queue of the session they belong to, one at a time, while the main thread waits. Every run that gets
-// as far as the network ends in notifyResult, all but one: a large download that fails leaves the process
-// waiting.
+// Made once by runOperation and kept for the whole run. grabTicket runs on the main thread; the callbacks run
+// on the serial queue of the session they belong to, one at a time, while the main thread waits. Every run
+// that gets as far as the network ends in notifyResult, all but one: a large download that fails leaves the
+// process waiting.
 #pragma once
 
 #include <cstdint>

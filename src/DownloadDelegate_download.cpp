@@ -11,11 +11,15 @@ constexpr std::string_view kFileNameToken = "${f}";
 constexpr std::string_view kAssetFileName = "lmasset.ticket";
 constexpr int kHTTPStatusOK = 200;
 
-std::string replacingAll(std::string text, std::string_view token, std::string_view replacement) {
-    for (std::size_t at = text.find(token); at != std::string::npos;
-         at = text.find(token, at + replacement.size()))
-        text.replace(at, token.size(), replacement);
-    return text;
+std::string replacingAll(std::string_view text, std::string_view token, std::string_view replacement) {
+    std::string replaced;
+    while (true) {
+        const std::size_t at = text.find(token);
+        replaced += text.substr(0, at);
+        if (at == std::string_view::npos) return replaced;
+        replaced += replacement;
+        text.remove_prefix(at + token.size());
+    }
 }
 
 }  // namespace
@@ -26,7 +30,12 @@ bool DownloadDelegate::asynchronouslyDownloadLargeTicketFromURLString(const std:
     request.url = URL::fromString(text);
     if (!request.url) MessageLog("Large ticket was requested from an invalid URL: %@", request.url);
     NoisyLog("URL of large ticket asset: %@", text);
-    downloadSession_ = platform_.https.ephemeralSession(*this);
+    auto session = platform_.https.ephemeralSession(*this);
+    if (!session) {
+        NoisyLog("No session for the large ticket: %@", session.error());
+        return false;
+    }
+    downloadSession_ = *std::move(session);
     downloadTask_ = downloadSession_->downloadTask(std::move(request));
     downloadTask_->resume();
     return downloadTask_->state() == https::TaskState::running;
@@ -35,6 +44,8 @@ bool DownloadDelegate::asynchronouslyDownloadLargeTicketFromURLString(const std:
 void DownloadDelegate::didFinishDownloading(https::Session&, https::Task& task, const URL& location) {
     const auto data = platform_.files.contentsOfFile(location).asOptional();
     const std::size_t length = data ? data->size() : 0;
+    // Whatever size was announced, and although the stapled ticket has recorded 0: this one was not seen.
+    if (!data) hashedFile_->setAppropriateExitCode(kExitDataError);
     const auto response = task.response();
     if (length != largeTicketSize_.unsignedIntegerValue()) {
         MessageLog("We were expecting a ticket size of %@ but download a ticket of size %lu",

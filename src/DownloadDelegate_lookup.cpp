@@ -109,7 +109,12 @@ bool DownloadDelegate::grabTicket() {
         lookupDidComplete(std::nullopt, std::nullopt, configurationError);
         return true;
     }
-    lookupSession_ = platform_.https.ephemeralSession(*this);
+    auto session = platform_.https.ephemeralSession(*this);
+    if (!session) {
+        lookupDidComplete(std::nullopt, std::nullopt, session.error());
+        return true;
+    }
+    lookupSession_ = *std::move(session);
     const auto task = lookupSession_->dataTask(
         std::move(request), [this](const auto& data, const auto& response, const auto& error) {
             lookupDidComplete(data, response, error);

@@ -1,13 +1,11 @@
-// The entry point: options, the operation and the path, and the hand-off to the controller.
+// The entry point: options, the operation and the path.
 
 #include <getopt.h>
 #include <malloc.h>
 #include <unistd.h>
 
-#include <cerrno>
 #include <csignal>
 #include <cstdlib>
-#include <memory>
 #include <string>
 #include <string_view>
 
@@ -16,12 +14,11 @@
 #include "src/DownloadDelegate.h"
 #include "src/host_platform.h"
 #include "src/messages.h"
+#include "src/run.h"
 
 namespace {
 
 using namespace pinwell;
-
-constexpr int kExitNothingRecorded = 1;
 
 // The operation of the run, and the long options; process-wide, as the option scan is.
 std::uint8_t operation = kOperationNone;
@@ -51,7 +48,8 @@ void printUsage() {
 }
 
 void scanOptions(int argc, char** argv) {
-    opterr = 0;  // the usage text says it all
+    unsetenv("POSIXLY_CORRECT");  // with it, the scan would stop at the command word
+    opterr = 0;                   // the usage text says it all
     for (int found = 0; (found = getopt_long(argc, argv, "qv", options, nullptr)) != -1;) {
         switch (found) {
             case 'q':
@@ -73,44 +71,6 @@ std::uint8_t operationForCommand(std::string_view command) {
     if (command == "validate") return kOperationValidate;
     if (operation == kOperationNone && command == "staple") return kOperationStaple;
     return kOperationNone;
-}
-
-// False when another process has it. What cannot be locked, since there is no such file or its file system
-// knows no locks, is left to those that come after: before they write, they look at what has changed in the
-// meantime.
-bool lockArtefact(const Platform& platform, const URL& path, std::unique_ptr<files::ItemLock>& lock) {
-    auto locked = platform.files.lockItem(path);
-    if (locked) {
-        lock = *std::move(locked);
-        return true;
-    }
-    if (locked.error().code() != EBUSY) return true;
-    MessageLog("Another process keeps %@ locked. Nothing was written to it.", path.path());
-    return false;
-}
-
-int run(const URL& path) {
-    const HostPlatform host([](int status) { std::exit(status); });
-    const Platform platform = host.services();
-
-    // Held to the end: of two staples of one artefact, the second begins to read when the first has read back
-    // what it wrote.
-    std::unique_ptr<files::ItemLock> lock;
-    if (operation == kOperationStaple && !lockArtefact(platform, path, lock)) return kExitCannotCreate;
-
-    const auto hashedFile = PWHashedFile::initWithFileURL(path, platform);
-    if (hashedFile == nullptr) return kExitNoInput;
-    if (hashedFile->appropriateExitCode() != kExitOK) return hashedFile->appropriateExitCode();
-
-    foundation::RunLoop mainRunLoop;
-    DownloadDelegate controller(hashedFile, platform);
-    controller.setOperation(operation);
-    if (controller.grabTicket()) {
-        mainRunLoop.run();
-        return kExitOK;
-    }
-    const int code = controller.hashedFile()->appropriateExitCode();
-    return code == kExitOK ? kExitNothingRecorded : code;
 }
 
 }  // namespace
@@ -138,5 +98,7 @@ int main(int argc, char** argv) {
         printUsage();
         return kExitUsage;
     }
-    return run(URL::fileURLWithPath(path));
+    const HostPlatform host([](int status) { std::exit(status); });
+    foundation::RunLoop mainRunLoop;
+    return runOperation(operation, URL::fileURLWithPath(path), host.services(), [&] { mainRunLoop.run(); });
 }

@@ -15,6 +15,7 @@ namespace pinwell::foundation {
 /// An exception that leaves a piece of work ends the process.
 class SerialQueue {
   public:
+    /// Throws std::system_error when there is no thread to be had.
     explicit SerialQueue(std::string name);
     ~SerialQueue();
     SerialQueue(const SerialQueue&) = delete;

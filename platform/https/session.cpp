@@ -6,6 +6,7 @@
 #include <csignal>
 #include <deque>
 #include <mutex>
+#include <system_error>
 #include <thread>
 
 #include "foundation/process.h"
@@ -227,8 +228,14 @@ class NetworkSessionService : public SessionService {
     NetworkSessionService(trust::TrustService& trust, SessionOptions options)
         : trust_(trust), options_(std::move(options)) {}
 
-    std::shared_ptr<Session> ephemeralSession(SessionDelegate& delegate) override {
-        return std::make_shared<NetworkSession>(delegate, trust_, options_);
+    Result<std::shared_ptr<Session>> ephemeralSession(SessionDelegate& delegate) override {
+        try {
+            return std::shared_ptr<Session>(std::make_shared<NetworkSession>(delegate, trust_, options_));
+        } catch (const std::system_error& failure) {
+            return makeError(
+                URLErrorCode::resourceUnavailable,
+                "No thread could be started for the connection: " + failure.code().message() + ".");
+        }
     }
 
   private:

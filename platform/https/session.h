@@ -46,6 +46,7 @@ enum class URLErrorCode : std::int64_t {
     proxyFailed = 11,
     cannotWriteFile = 12,
     invalidConfiguration = 13,
+    resourceUnavailable = 14,  // no more threads to be had
     unknown = 99,
 };
 
@@ -154,8 +155,9 @@ class SessionService {
   public:
     virtual ~SessionService() = default;
 
-    /// The delegate must outlive the session.
-    virtual std::shared_ptr<Session> ephemeralSession(SessionDelegate& delegate) = 0;
+    /// The delegate must outlive the session. A session has threads of its own: an error of
+    /// `resourceUnavailable` where the user or the container may not have them.
+    virtual foundation::Result<std::shared_ptr<Session>> ephemeralSession(SessionDelegate& delegate) = 0;
 };
 
 /// Sessions over the network. The trust service must outlive them.

@@ -151,7 +151,7 @@ bool letsIn(const Scene& scene, trust::TrustService& service, const ChainCase& o
         return false;
     test::ControllerRun run;
     const test::MessageCapture output(kVerbosityNormal);
-    const auto session = run.platform.https.ephemeralSession(run.controller);
+    const auto session = *run.platform.https.ephemeralSession(run.controller);
     std::optional<https::Disposition> given;
     run.controller.didReceiveChallenge(*session, {one.host, https::AuthenticationMethod::serverTrust, object},
                                        [&](https::Disposition disposition,

@@ -6,6 +6,7 @@
 
 #include "e2e/artefacts.h"
 #include "src/DownloadDelegate.h"
+#include "src/run.h"
 #include "support/code_directory_builder.h"
 #include "support/controller_run.h"
 #include "support/executable_image_builder.h"
@@ -15,7 +16,6 @@ namespace pinwell::test {
 namespace {
 
 constexpr foundation::Date kNow{1795204500};  // 2026-11-20 19:55:00 UTC
-constexpr int kNothingRecorded = 1;           // as main ends a run that has recorded nothing
 constexpr std::size_t kData = 1000;           // bytes of an artefact's own
 
 std::string ticketPath(const std::string& bundle) {
@@ -105,24 +105,16 @@ bool ToolRun::passesOffline(const std::string& path) {
 
 int ToolRun::run(const std::string& path, const std::string& answer, std::uint8_t operation) {
     const MessageCapture output(kVerbosityNormal);
-    const auto file = PWHashedFile::initWithFileURL(URL::fileURLWithPath(path), services_);
-    if (file == nullptr) return kExitNoInput;
-    if (file->appropriateExitCode() != kExitOK) return file->appropriateExitCode();
-
-    DownloadDelegate controller(file, services_);
-    controller.setOperation(operation);
-    bool isAsynchronous = false;
-    const auto early = platform_.exitStatusOf([&] { isAsynchronous = controller.grabTicket(); });
-    if (early) return *early;
-    if (!isAsynchronous) {
-        const int code = controller.hashedFile()->appropriateExitCode();
-        return code == kExitOK ? kNothingRecorded : code;
-    }
     const https::HTTPResponse response{
         *URL::fromString("https://api.lumora.example/"), 200, {{"X-Ostrel-Request-UUID", "REQUEST"}}};
-    const auto completion = platform_.https.sessions.back()->completions.at(0);
-    return platform_.exitStatusOf([&] { completion(foundation::toData(answer), response, std::nullopt); })
-        .value_or(kNothingRecorded);
+    const auto answerLookup = [&] {
+        const auto completion = platform_.https.sessions.back()->completions.at(0);
+        completion(foundation::toData(answer), response, std::nullopt);
+    };
+    int status = kExitNothingRecorded;
+    const auto ended = platform_.exitStatusOf(
+        [&] { status = runOperation(operation, URL::fileURLWithPath(path), services_, answerLookup); });
+    return ended.value_or(status);
 }
 
 }  // namespace pinwell::test

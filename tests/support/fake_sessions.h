@@ -43,11 +43,13 @@ class FakeSession : public https::Session {
 
 class FakeSessionService : public https::SessionService {
   public:
-    std::shared_ptr<https::Session> ephemeralSession(https::SessionDelegate&) override {
+    foundation::Result<std::shared_ptr<https::Session>> ephemeralSession(https::SessionDelegate&) override {
+        if (failure) return *failure;
         sessions.push_back(std::make_shared<FakeSession>());
-        return sessions.back();
+        return std::shared_ptr<https::Session>(sessions.back());
     }
 
+    std::optional<foundation::Error> failure;  // of those that are made from now on
     std::vector<std::shared_ptr<FakeSession>> sessions;
 };
 

@@ -4,15 +4,10 @@
 #include <cerrno>
 #include <ostream>
 
+#include "src/run.h"
 #include "support/message_capture.h"
 
 namespace pinwell::test {
-namespace {
-
-// As main ends a run that has recorded nothing.
-constexpr int kExitNothingRecorded = 1;
-
-}  // namespace
 
 bool Outcome::says(std::string_view beginning) const {
     return std::any_of(lines.begin(), lines.end(),
@@ -39,22 +34,16 @@ Outcome Stapling::staple(const std::string& path, const Data& ticket) {
 
 int Stapling::run(const URL& path, const Data& ticket) {
     const Platform services = platform_.servicesWith(*codeSigning_);
-    const auto file = PWHashedFile::initWithFileURL(path, services);
-    if (file == nullptr) return kExitNoInput;
-    if (file->appropriateExitCode() != kExitOK) return file->appropriateExitCode();
-
-    DownloadDelegate controller(file, services);
-    controller.setOperation(kOperationStaple);
-    if (!controller.grabTicket()) {
-        const int code = controller.hashedFile()->appropriateExitCode();
-        return code == kExitOK ? kExitNothingRecorded : code;
-    }
     const https::HTTPResponse response{
         *URL::fromString("https://api.lumora.example/"), 200, {{"X-Ostrel-Request-UUID", "REQUEST"}}};
-    const auto completion = platform_.https.sessions.back()->completions.at(0);
-    const auto status = platform_.exitStatusOf(
-        [&] { completion(foundation::toData(ControllerRun::inlineAnswer(ticket)), response, std::nullopt); });
-    return status.value_or(kExitNothingRecorded);
+    const auto answerLookup = [&] {
+        const auto completion = platform_.https.sessions.back()->completions.at(0);
+        completion(foundation::toData(ControllerRun::inlineAnswer(ticket)), response, std::nullopt);
+    };
+    int status = kExitNothingRecorded;
+    const auto ended = platform_.exitStatusOf(
+        [&] { status = runOperation(kOperationStaple, path, services, answerLookup); });
+    return ended.value_or(status);
 }
 
 Outcome Stapling::erase(const std::string& path) {

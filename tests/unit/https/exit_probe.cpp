@@ -44,8 +44,8 @@ int main(int argc, char** argv) {
     const auto service = https::makeSessionService(trust);
     ExitingDelegate delegate;
     delegate.endsAtTheChallenge = mode == "challenge";
-    const auto first = service->ephemeralSession(delegate);
-    const auto second = service->ephemeralSession(delegate);
+    const auto first = *service->ephemeralSession(delegate);
+    const auto second = *service->ephemeralSession(delegate);
 
     std::shared_ptr<https::Task> download;
     const auto lookup = first->dataTask(request, [&](const auto&, const auto&, const auto& error) {

@@ -45,7 +45,7 @@ ServerIdentity SessionTest::identity() {
 https::Session& SessionTest::session() {
     if (!session_) {
         service_ = https::makeSessionService(trust, options);
-        session_ = service_->ephemeralSession(delegate);
+        session_ = *service_->ephemeralSession(delegate);
     }
     return *session_;
 }

@@ -1,5 +1,9 @@
 // Tasks, their states, and the queue that callbacks run on.
+#include <sys/resource.h>
+#include <unistd.h>
+
 #include "session_fixture.h"
+#include "support/file_properties.h"
 
 namespace pinwell::test {
 namespace {
@@ -61,7 +65,7 @@ TEST_F(SessionTasks, CallBackOnOneThreadThatIsNotTheCallers) {
 TEST_F(SessionTasks, OfTwoSessionsCallBackOnDifferentThreads) {
     const auto service = https::makeSessionService(trust, options);
     RecordingDelegate otherDelegate;
-    const auto other = service->ephemeralSession(otherDelegate);
+    const auto other = *service->ephemeralSession(otherDelegate);
     fetch(server.url());
     std::promise<void> done;
     other->dataTask(get(server.url()), [&](auto&, auto&, auto&) { done.set_value(); })->resume();
@@ -123,7 +127,7 @@ TEST_F(SessionTasks, MayStartADownloadOfAnotherSessionFromACallbackAndFindItRunn
     std::shared_ptr<https::Task> download;
     TaskState stateAfterStart = TaskState::suspended;
     const auto first = session().dataTask(get(server.url()), [&](auto&, auto&, auto&) {
-        second = service->ephemeralSession(other);
+        second = *service->ephemeralSession(other);
         download = second->downloadTask(get(server.url("/ticket")));
         download->resume();
         stateAfterStart = download->state();
@@ -148,7 +152,7 @@ class EndedSession : public SessionTest {
 TEST_F(EndedSession, CancelsWhatIsRunning) {
     Gate gate;
     server.enqueue(Script().readRequest().waitFor(gate));
-    auto own = service->ephemeralSession(delegate);
+    auto own = *service->ephemeralSession(delegate);
     own->dataTask(get(server.url()), noteError())->resume();
     ASSERT_TRUE(gate.waitUntilReached());
     own.reset();
@@ -160,7 +164,7 @@ TEST_F(EndedSession, CancelsWhatIsRunning) {
 TEST_F(EndedSession, CancelsWhatHasNotHadItsTurn) {
     Gate gate;
     server.enqueue(Script().waitFor(gate));
-    auto own = service->ephemeralSession(delegate);
+    auto own = *service->ephemeralSession(delegate);
     own->dataTask(get(server.url()), {})->resume();
     ASSERT_TRUE(gate.waitUntilReached());
     const auto waiting = own->dataTask(get(server.url()), noteError());
@@ -172,7 +176,7 @@ TEST_F(EndedSession, CancelsWhatHasNotHadItsTurn) {
 }
 
 TEST_F(EndedSession, StartsNothingAnyMore) {
-    auto own = service->ephemeralSession(delegate);
+    auto own = *service->ephemeralSession(delegate);
     const auto task = own->dataTask(get(server.url()), noteError());
     own.reset();
     task->resume();
@@ -180,8 +184,23 @@ TEST_F(EndedSession, StartsNothingAnyMore) {
     EXPECT_FALSE(error);
 }
 
+TEST(SessionService, SaysThatThereIsNoThreadToBeHad) {
+    const auto check = [] {
+        // The limit does not hold for the superuser.
+        if (isSuperuser() && setresuid(65534, 65534, 65534) != 0) _exit(2);
+        constexpr rlimit kNoMore{0, 0};
+        if (setrlimit(RLIMIT_NPROC, &kNoMore) != 0) _exit(3);
+        FakeTrustService trust;
+        RecordingDelegate delegate;
+        const auto session = https::makeSessionService(trust)->ephemeralSession(delegate);
+        if (session) _exit(4);
+        _exit(session.error().code() == static_cast<std::int64_t>(URLErrorCode::resourceUnavailable) ? 0 : 5);
+    };
+    EXPECT_EXIT(check(), ::testing::ExitedWithCode(0), "");
+}
+
 TEST_F(EndedSession, CostsNothingUnused) {
-    service->ephemeralSession(delegate).reset();
+    EXPECT_TRUE(service->ephemeralSession(delegate));
 }
 
 }  // namespace

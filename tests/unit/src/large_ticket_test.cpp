@@ -57,6 +57,22 @@ TEST_F(LargeTicket, EveryTokenIsReplaced) {
     EXPECT_EQ(requestedURL(), "https://assets.example/lmasset.ticket/as?name=lmasset.ticket");
 }
 
+TEST_F(LargeTicket, AMillionTokensAreReplacedInOnePass) {
+    std::string tokens;
+    std::string names;
+    for (int i = 0; i < 1'000'000; ++i) {
+        tokens += "${f}";
+        names += "lmasset.ticket";
+    }
+    EXPECT_TRUE(start("https://assets.example/" + tokens));
+    EXPECT_EQ(requestedURL(), "https://assets.example/" + names);
+}
+
+TEST_F(LargeTicket, WithoutASessionIsNotUnderWay) {
+    run.platform.https.failure = foundation::Error(std::string(foundation::kURLErrorDomain), 14, "no thread");
+    EXPECT_FALSE(start("https://assets.example/${f}"));
+}
+
 TEST_F(LargeTicket, ATemplateWithoutTheTokenIsUsedUnchanged) {
     EXPECT_TRUE(start("https://assets.example/ticket?key=a%20b"));
     EXPECT_EQ(requestedURL(), "https://assets.example/ticket?key=a%20b");
@@ -169,14 +185,16 @@ TEST_F(LargeTicket, ADownloadThatCannotBeReadIsOfSize0) {
                                      " but download a ticket of size 0");
 }
 
-TEST_F(LargeTicket, ADownloadThatCannotBeReadAndIsAnnouncedAsEmptyCannotBeSaved) {
-    run.controller.setLargeTicketSize(0);
-    run.platform.files.fail("contentsOfFile", EIO);
-    run.file->setAppropriateExitCode(66);
-    const MessageCapture output(kVerbosityNormal);
-    EXPECT_EQ(finish(ticket), 66);
-    EXPECT_EQ(output.lines(), (std::vector<std::string>{"Could not save data. A parameter was not valid.",
-                                                        "The validate action failed! Error 66."}));
+TEST_F(LargeTicket, ADownloadThatCannotBeReadIsNoApprovalAlsoWhenItIsAnnouncedAsEmpty) {
+    for (const Value& announced : {Value(0), Value()}) {
+        run.controller.setLargeTicketSize(announced);
+        run.platform.files.fail("contentsOfFile", EIO);
+        run.file->setAppropriateExitCode(kExitOK);  // as the stapled ticket left it
+        const MessageCapture output(kVerbosityNormal);
+        EXPECT_EQ(finish(ticket), 65);
+        EXPECT_EQ(output.lines(), (std::vector<std::string>{"Could not save data. A parameter was not valid.",
+                                                            "The validate action failed! Error 65."}));
+    }
 }
 
 TEST_F(LargeTicket, AFailedDownloadRecords68NamesThePathAndDoesNotEndTheRun) {

@@ -24,7 +24,7 @@ class ServerTrust : public testing::Test {
 
     https::Disposition judge(const std::string& host = "api.lumora.example",
                              https::AuthenticationMethod method = https::AuthenticationMethod::serverTrust) {
-        const auto session = run.platform.https.ephemeralSession(run.controller);
+        const auto session = *run.platform.https.ephemeralSession(run.controller);
         int calls = 0;
         auto given = https::Disposition::performDefaultHandling;
         run.controller.didReceiveChallenge(

@@ -1,0 +1,49 @@
+#include "src/run.h"
+
+#include <cerrno>
+#include <memory>
+
+#include "src/DownloadDelegate.h"
+#include "src/messages.h"
+
+namespace pinwell {
+namespace {
+
+// False when another process has it. What cannot be locked, since there is no such file or its file system
+// knows no locks, is left to those that come after: before they write, they look at what has changed in the
+// meantime.
+bool lockArtefact(const Platform& platform, const URL& path, std::unique_ptr<files::ItemLock>& lock) {
+    auto locked = platform.files.lockItem(path);
+    if (locked) {
+        lock = *std::move(locked);
+        return true;
+    }
+    if (locked.error().code() != EBUSY) return true;
+    MessageLog("Another process keeps %@ locked. Nothing was written to it.", path.path());
+    return false;
+}
+
+}  // namespace
+
+int runOperation(std::uint8_t operation, const URL& path, const Platform& platform,
+                 const std::function<void()>& waitForEnd) {
+    // Held to the end: of two staples of one artefact, the second begins to read when the first has read back
+    // what it wrote.
+    std::unique_ptr<files::ItemLock> lock;
+    if (operation == kOperationStaple && !lockArtefact(platform, path, lock)) return kExitCannotCreate;
+
+    const auto hashedFile = PWHashedFile::initWithFileURL(path, platform);
+    if (hashedFile == nullptr) return kExitNoInput;
+    if (hashedFile->appropriateExitCode() != kExitOK) return hashedFile->appropriateExitCode();
+
+    DownloadDelegate controller(hashedFile, platform);
+    controller.setOperation(operation);
+    if (controller.grabTicket()) {
+        waitForEnd();
+        return kExitOK;
+    }
+    const int code = controller.hashedFile()->appropriateExitCode();
+    return code == kExitOK ? kExitNothingRecorded : code;
+}
+
+}  // namespace pinwell

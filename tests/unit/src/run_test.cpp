@@ -1,0 +1,89 @@
+// How a run ends: with an exit status of its own, or with its controller's.
+#include "src/run.h"
+
+#include <gmock/gmock.h>
+
+#include <cerrno>
+#include <filesystem>
+
+#include "src/DownloadDelegate.h"
+#include "support/controller_run.h"
+#include "support/message_capture.h"
+
+namespace pinwell::test {
+namespace {
+
+using testing::Contains;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using testing::StartsWith;
+
+/// A bundle that the service has a ticket for, and nobody who answers.
+class Run : public testing::Test {
+  protected:
+    int operate(std::uint8_t operation, const std::string& path) {
+        return runOperation(operation, URL::fileURLWithPath(path), made.platform.services(),
+                            [this] { ++waits; });
+    }
+    int staple() { return operate(kOperationStaple, made.artefact()); }
+
+    ControllerRun made;
+    TestPlatform& platform = made.platform;
+    const MessageCapture output{kVerbosityNormal};
+    int waits = 0;
+};
+
+TEST_F(Run, WaitsForItsControllerOnceTheLookupIsUnderWay) {
+    EXPECT_EQ(staple(), kExitOK);
+    EXPECT_EQ(waits, 1);
+    EXPECT_EQ(platform.https.sessions.size(), 1U);
+}
+
+TEST_F(Run, ThatStartsNothingEndsWithWhatItRecorded) {
+    platform.codeSigning.information.reset();
+    EXPECT_EQ(staple(), kExitNoInput);
+    EXPECT_EQ(waits, 0);
+}
+
+TEST_F(Run, OfWhatCannotBeReadEndsWithTheFilesOwnCode) {
+    EXPECT_EQ(operate(kOperationStaple, platform.directory / "none"), kExitNoInput);
+    EXPECT_EQ(waits, 0);
+}
+
+TEST_F(Run, OfAKindThatIsNotSupportedEndsWith66) {
+    writeFile(platform.directory / "notes.txt", std::string_view("text"));
+    EXPECT_EQ(operate(kOperationStaple, platform.directory / "notes.txt"), kExitNoInput);
+    EXPECT_THAT(output.lines(), Contains(StartsWith("Pinwell is incapable of working with")));
+}
+
+TEST_F(Run, ThatStaplesWhatAnotherKeepsLockedEndsWith73BeforeItReadsAnything) {
+    platform.files.fail("lockItem", EBUSY);
+    EXPECT_EQ(staple(), kExitCannotCreate);
+    EXPECT_THAT(output.lines(), ElementsAre("Another process keeps " + made.artefact() +
+                                            " locked. Nothing was written to it."));
+    EXPECT_THAT(platform.files.names(), ElementsAre("lockItem"));
+    EXPECT_EQ(waits, 0);
+}
+
+TEST_F(Run, ThatStaplesGoesOnWhereNothingCanBeLocked) {
+    for (const int reason : {EOPNOTSUPP, ENOLCK, EACCES}) {
+        platform.files.fail("lockItem", reason);
+        EXPECT_EQ(staple(), kExitOK) << reason;
+    }
+    EXPECT_EQ(waits, 3);
+}
+
+TEST_F(Run, ThatValidatesLocksNothing) {
+    operate(kOperationValidate, made.artefact());
+    EXPECT_EQ(platform.files.count("lockItem"), 0U);
+    EXPECT_THAT(platform.files.changes(), IsEmpty());
+}
+
+TEST_F(Run, ThatCanHaveNoSessionEndsAsOneThatReachesNobody) {
+    platform.https.failure = foundation::Error(std::string(foundation::kURLErrorDomain), 14, "no thread");
+    EXPECT_EQ(platform.exitStatusOf([this] { staple(); }), kExitNoHost);
+    EXPECT_THAT(output.lines(), Contains(StartsWith("error is ")));
+}
+
+}  // namespace
+}  // namespace pinwell::test
