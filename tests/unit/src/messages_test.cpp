@@ -2,7 +2,10 @@
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <poll.h>
 #include <unistd.h>
+
+#include <thread>
 
 #include "support/message_capture.h"
 
@@ -56,6 +59,38 @@ TEST(Messages, AClosedOutputLosesTheLineAndNothingElse) {
     close(output);
     MessageLog("kept");
     EXPECT_EQ(capture.text(), "kept\n");
+}
+
+TEST(Messages, AReaderThatLagsBehindANonBlockingPipeGetsEveryLine) {
+    const MessageCapture capture(kVerbosityNormal);
+    const int output = dup(STDOUT_FILENO);
+    int ends[2] = {-1, -1};
+    ASSERT_EQ(pipe2(ends, O_CLOEXEC | O_NONBLOCK), 0);
+    const int room = fcntl(ends[1], F_SETPIPE_SZ, 4096);
+    ASSERT_GT(room, 0);
+    dup2(ends[1], STDOUT_FILENO);
+    close(ends[1]);
+
+    const std::string line(static_cast<std::size_t>(room) + 100, 'x');  // more than fits at once
+    std::string read;
+    std::thread reader([&, end = ends[0]] {
+        pollfd ready{end, POLLIN, 0};
+        char chunk[512];
+        while (poll(&ready, 1, -1) > 0) {
+            const ssize_t count = ::read(end, chunk, sizeof chunk);
+            if (count <= 0) return;
+            read.append(chunk, static_cast<std::size_t>(count));
+        }
+    });
+    for (int i = 0; i < 20; ++i) MessageLog("%@", line);
+    dup2(output, STDOUT_FILENO);
+    reader.join();
+    close(ends[0]);
+    close(output);
+
+    std::string all;
+    for (int i = 0; i < 20; ++i) all += line + '\n';
+    EXPECT_EQ(read, all);
 }
 
 }  // namespace
