@@ -88,9 +88,9 @@ URL URL::fileURLWithPath(std::string_view path) {
     } else {
         std::error_code failure;
         const std::filesystem::path current = std::filesystem::current_path(failure);
-        // Without a current directory the path stays relative and leads nowhere; below the root it could lead
-        // to some other file.
-        url.path_ = failure ? std::string(path) : tidyPath(current.native() + "/" + std::string(path));
+        // A directory that was removed has no path any more. The kernel's link to it leads where a relative
+        // path would; hung below the root, the path could lead to some other file.
+        url.path_ = tidyPath((failure ? "/proc/self/cwd" : current.native()) + "/" + std::string(path));
     }
     return url;
 }

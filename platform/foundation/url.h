@@ -12,7 +12,7 @@ namespace pinwell::foundation {
 /// Immutable; copies are cheap enough to pass by value.
 class URL {
   public:
-    /// A relative path is taken against the current directory (left as it is when that has been removed).
+    /// A relative path is taken against the current directory, under "/proc/self/cwd" when that has no path.
     /// Trailing slashes, doubled slashes and "." components are dropped; ".." stays, since what it means
     /// depends on links. An empty path stays empty and names nothing.
     static URL fileURLWithPath(std::string_view path);

@@ -119,6 +119,14 @@ TEST_F(CommandLine, QuietSaysNothingAtAll) {
     EXPECT_EQ(stapled(), foundation::toData(readFile(temporaryPath("REQUEST.ticket"))));
 }
 
+TEST_F(CommandLine, OptionsHoldBehindThePathWhateverTheEnvironmentSays) {
+    environment["POSIXLY_CORRECT"] = "1";
+    const ProcessResult result = pinwell({"staple", bundle, "-q", bundle});
+    EXPECT_EQ(result.exitStatus, 0);
+    EXPECT_EQ(result.output, "");
+    EXPECT_EQ(result.errors, "");
+}
+
 TEST_F(CommandLine, TheUsageIsPrintedInQuietModeToo) {
     const ProcessResult result = pinwell({"staple", "-q", "--help", bundle});
     EXPECT_EQ(result.exitStatus, 0);
@@ -167,6 +175,17 @@ TEST_F(CommandLine, ARelativePathIsTakenFromTheCurrentDirectory) {
         EXPECT_EQ(result.exitStatus, 0) << path;
         EXPECT_THAT(result.outputLines(), Contains(kWorked)) << path;
     }
+}
+
+TEST_F(CommandLine, ARelativePathFromADirectoryThatWasRemovedLeadsToNoOtherFile) {
+    Command run =
+        command({"-c", R"(mkdir gone && cd gone && rmdir ../gone && exec "$0" staple ../Sample.app)",
+                 PINWELL_PROGRAM});
+    run.executable = "/bin/sh";
+    run.workingDirectory = std::filesystem::path(bundle).parent_path();
+    ASSERT_EQ(std::filesystem::path(bundle).filename(), "Sample.app");
+    EXPECT_THAT(runProcess(run), Ended(0, Contains(kWorked)));
+    EXPECT_EQ(stapled(), ticket());
 }
 
 TEST_F(CommandLine, APathThatDoesNotExistIsSaidSoOnce) {
