@@ -93,12 +93,14 @@ Result<std::string> moveToTrash(const std::string& path) {
     const FileDescriptor item(
         uninterrupted([&] { return open(path.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC); }));
     if (!item) return lastError(path);
-    // Asked before as well: what could not be told afterwards is better not moved.
-    if (const auto before = currentPath(item.get(), path); !before) return before.error();
+    // Asked before as well: what could not be told afterwards is better not moved. And the library takes ".."
+    // off a path by its text, which leads elsewhere behind a link; the kernel's path has none.
+    const auto before = currentPath(item.get(), path);
+    if (!before) return before.error();
 
     if (!gio().isThere) return Error::posix(ENOSYS, path);
     // The local file system's own objects; the default ones may come from a desktop's modules.
-    const FilePointer file(gio().vfsGetFileForPath(gio().vfsGetLocal(), path.c_str()));
+    const FilePointer file(gio().vfsGetFileForPath(gio().vfsGetLocal(), before->c_str()));
     GError* failure = nullptr;
     if (gio().fileTrash(file.get(), nullptr, &failure) == 0) {
         const ErrorPointer owned(failure);

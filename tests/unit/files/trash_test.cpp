@@ -92,6 +92,18 @@ TEST_F(Trash, TakesALinkAndNotWhatItLeadsTo) {
     EXPECT_EQ(readFile(path("target")), "x");
 }
 
+TEST_F(Trash, TakesTheItemThatAPathUpFromALinkLeadsTo) {
+    writeFile(path("item"), "another's");
+    writeFile(path("real/item"), "meant");
+    makeDirectory(path("real/inner"));
+    makeLink(path("real/inner"), path("link"));
+    const auto place = manager->trashItem(url("link/../item"));
+    ASSERT_THAT(place, Succeeds());
+    EXPECT_EQ(readFile(place->path()), "meant");
+    EXPECT_TRUE(exists(path("item")));
+    EXPECT_FALSE(exists(path("real/item")));
+}
+
 TEST_F(Trash, TakesADirectory) {
     writeFile(path("folder/file"), "x");
     const auto place = manager->trashItem(url("folder"));
