@@ -109,8 +109,8 @@ class TableOfContentsReader::Parser {
 
     static constexpr std::size_t kChildOfTable = 3;
 
-    // Not the status that the parser returns, to which an undeclared name-space prefix is an error. And a parser
-    // that ran out of memory or names has stopped, without a word on what it has not seen.
+    // Not the status that the parser returns, to which an undeclared name-space prefix is an error. And a
+    // parser that ran out of memory or names has stopped, without a word on what it has not seen.
     bool isWellFormed() const { return context_->wellFormed != 0 && context_->disableSAX == 0; }
 
     // Nothing may be thrown through the parser, which is C.
@@ -141,7 +141,7 @@ class TableOfContentsReader::Parser {
         } else if (depth_ + 1 == kChildOfTable) {
             if (name != "toc") return passOver();
             if (std::exchange(found_, true)) refuse();
-        } else if (depth_ == kChildOfTable && name == "signature") {
+        } else if (depth_ == kChildOfTable && isSignature(name)) {
             if (table_.signatures.size() == kMaximumSignatures) return refuse();
             table_.signatures.push_back(styleAmong(attributes));
             passOver();
@@ -153,6 +153,9 @@ class TableOfContentsReader::Parser {
     }
 
     void passOver() { passedOver_ = depth_; }
+
+    // The second came later, for what older readers should not stumble over: they take it for a property.
+    static bool isSignature(std::string_view name) { return name == "signature" || name == "x-signature"; }
 
     void beginProperty(std::string_view name, std::span<const xmlChar* const> attributes) {
         if (name.size() + 1 > kMaximumPath - path_.size()) return refuse();

@@ -9,9 +9,10 @@
 //     </toc>
 //   </xar>
 //
-// Elements go by their local names. A child of `toc` is a signature, a file, or a property; what is inside
-// the first two is passed over. Of several properties at one path the first one counts, but a second
-// checksum, or a second offset or size in it, is refused: readers must not differ in what is checked.
+// Elements go by their local names. A child of `toc` is a signature, by either of its names, a file, or a
+// property; what is inside the first two is passed over. Of several properties at one path the first one
+// counts, but a second checksum, or a second offset or size in it, is refused: readers must not differ in
+// what is checked.
 //
 // Refused besides: what is not well-formed, or has a document type or an entity of its own (markup_guard.h);
 // a root other than `xar`; no `toc`, or two; and what passes a limit below.

@@ -40,11 +40,13 @@ TEST_F(ArchiveSignatures, WithoutAStyleHaveNoType) {
                 ElementsAre(std::nullopt, std::nullopt, "CMS"));
 }
 
-TEST_F(ArchiveSignatures, AnXSignatureIsNone) {
-    const auto archive =
-        open(ArchiveBuilder().element("<x-signature style='CMS'><size>7</size></x-signature>"));
-    EXPECT_TRUE(types(archive).empty());
-    EXPECT_EQ(property(archive, "x-signature/size"), (Property{0, "7"}));
+TEST_F(ArchiveSignatures, OfBothNamesComeInDocumentOrder) {
+    EXPECT_THAT(types(open(ArchiveBuilder().element(
+                    "<signature style='RSA'/><x-signature style='CMS'><size>7</size></x-signature>"))),
+                ElementsAre("RSA", "CMS"));
+    EXPECT_THAT(types(open(ArchiveBuilder().element("<x-signature style='A'/><signature style='B'/>"))),
+                ElementsAre("A", "B"));
+    EXPECT_TRUE(types(open(ArchiveBuilder().element("<y-signature style='CMS'/>"))).empty());
 }
 
 TEST_F(ArchiveSignatures, InsideAFileOrAnythingElseAreNone) {
