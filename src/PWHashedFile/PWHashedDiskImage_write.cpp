@@ -1,5 +1,6 @@
 // How a disk image gets its ticket, and loses it: a new superblob and the trailer, put where the image's data
 // end.
+#include <cerrno>
 #include <limits>
 #include <utility>
 
@@ -29,6 +30,11 @@ bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& sou
     }
 
     Data superblob = superblobWithTicket(signature_.blobs, ticket);
+    if (!deleteExisting && !isReadableSuperblob(superblob)) {
+        held = Error::posix(EFBIG, target.path());
+        NoisyLog("Cannot add a new ticket to %@. %@", name, held);
+        return failedToWrite(held, error);
+    }
     if (!superblob.empty() && !writeSignature(std::move(superblob), target, deleteExisting, held))
         return failedToWrite(held, error);
     setAppropriateExitCode(kExitOK);

@@ -1,4 +1,5 @@
 // How a flat package gets its ticket, and loses it.
+#include <cerrno>
 #include <utility>
 
 #include "foundation/process.h"
@@ -23,6 +24,11 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
     }
     const bool hasTicket =
         ticketData().has_value();  // the question reads the trailers, on which all below rests
+    if (!deleteExisting && trailers_.exceedsLimits) {
+        held = Error::posix(EFBIG, target.path());
+        NoisyLog("Cannot add a new ticket to %@. %@", targetName, held);
+        return failedToWrite(held, error);
+    }
     if (deleteExisting && !hasTicket) {
         NoisyLog("Cannot delete an existing ticket in %@ that doesn't exist.", targetName);
         return failedToWrite(held, error);

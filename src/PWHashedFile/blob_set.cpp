@@ -182,4 +182,12 @@ Data superblobWithTicket(const BlobSet& blobs, ByteView ticket) {
     return std::move(superblob).take();
 }
 
+bool isReadableSuperblob(ByteView superblob) {
+    if (superblob.empty()) return true;
+    ByteReader reader(superblob);
+    reader.skip(8, "superblob magic and length");
+    return reader.be32("superblob count") <= codesign::kMaximumBlobCount &&
+           superblob.size() <= codesign::kMaximumSuperBlobLength;
+}
+
 }  // namespace pinwell

@@ -69,4 +69,8 @@ foundation::Data emptySuperblob();
 /// empty. Empty when that leaves no blob at all. `ticket` is shorter than 4 GiB.
 foundation::Data superblobWithTicket(const BlobSet& blobs, foundation::ByteView ticket);
 
+/// Whether a superblob made by superblobWithTicket keeps within the limits of those who read it: one more
+/// blob, in an image at a limit, would be one too many for ever after.
+bool isReadableSuperblob(foundation::ByteView superblob);
+
 }  // namespace pinwell

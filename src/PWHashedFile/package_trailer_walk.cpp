@@ -135,9 +135,10 @@ class Walk {
         }
     }
 
-    static void mustNotExceed(std::uint64_t limit, std::uint64_t length) {
-        if (length > limit)
-            throw FileHandleError(foundation::format("More than %llu bytes are not read", limit));
+    void mustNotExceed(std::uint64_t limit, std::uint64_t length) {
+        if (length <= limit) return;
+        found_.exceedsLimits = true;
+        throw FileHandleError(foundation::format("More than %llu bytes are not read", limit));
     }
 
     FileReader& file_;

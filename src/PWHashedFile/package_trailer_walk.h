@@ -43,6 +43,10 @@ struct package_trailers {
 
     /// What ended the walk early, and where in the file.
     std::optional<ticket_fault> fault;
+
+    /// That was a limit of ours: there are trailers, or a ticket, that are not known and must not be written
+    /// over or behind.
+    bool exceedsLimits = false;
 };
 
 /// Told of every record that is met, the terminator and the ticket's included, with its place in the file.

@@ -2,6 +2,7 @@
 #include <sys/stat.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <filesystem>
 
 #include "disk_image_fixture.h"
@@ -14,6 +15,7 @@ using foundation::ByteWriter;
 using foundation::Data;
 using test::DiskImageBuilder;
 using test::Lines;
+using test::makeBlob;
 using test::MessageCapture;
 using test::SuperBlobBuilder;
 using test::ticketBlob;
@@ -69,6 +71,28 @@ class DiskImageWriting : public test::DiskImageTest {
     std::int32_t exitCode = 0;
     Data header;
 };
+
+TEST_F(DiskImageWriting, AddsNoBlobToAnImageThatHasTheMostOfThem) {
+    SuperBlobBuilder superblob = DiskImageBuilder::signature();
+    for (std::uint32_t i = 3; i < codesign::kMaximumBlobCount; ++i)
+        superblob.blob(0x20000 + i, makeBlob(0xFADE7171, {}));
+    const DiskImageBuilder before = DiskImageBuilder().superblob(superblob);
+    EXPECT_FALSE(write(before, "TICKET"));
+    expectFailedWith73AndUntouched(before);
+    EXPECT_EQ(
+        lines.back().find("Cannot add a new ticket to image.dmg. Error Domain=POSIXErrorDomain Code=27 "),
+        0U);
+    ASSERT_TRUE(error);
+    EXPECT_EQ(error->code(), EFBIG);
+}
+
+TEST_F(DiskImageWriting, AddsNoTicketThatMakesTheSuperblobTooLong) {
+    const auto filler = foundation::Data(codesign::kMaximumSuperBlobLength - 1000, std::byte{0});
+    const DiskImageBuilder before = DiskImageBuilder().superblob(
+        DiskImageBuilder::signature().blob(0x20000, makeBlob(0xFADE7171, filler)));
+    EXPECT_FALSE(write(before, std::string(1000, 't')));
+    expectFailedWith73AndUntouched(before);
+}
 
 TEST_F(DiskImageWriting, PutsASuperblobOf28BytesAndTheTicketInFrontOfAnUnsignedImagesTrailer) {
     ASSERT_TRUE(write(DiskImageBuilder(), "TICKET"));

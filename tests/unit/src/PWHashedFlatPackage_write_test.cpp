@@ -4,6 +4,7 @@
 #include <filesystem>
 
 #include "package_fixture.h"
+#include "src/PWHashedFile/package_trailer_walk.h"
 #include "support/archive_builder.h"
 
 namespace pinwell {
@@ -14,6 +15,7 @@ using test::MessageCapture;
 using test::PackageBuilder;
 using testing::Contains;
 using testing::ElementsAre;
+using testing::IsEmpty;
 using testing::StartsWith;
 
 class FlatPackageWriting : public test::FlatPackageTest {
@@ -44,6 +46,32 @@ TEST_F(FlatPackageWriting, TheFirstStapleAppendsTerminatorTicketAndRecord) {
     EXPECT_EQ(contents(), PackageBuilder().terminator().ticket("NEW TICKET").build());
     EXPECT_EQ(package.appropriateExitCode(), 0);
     EXPECT_EQ(package.ticketStart(), PackageBuilder().archiveSize() + 16);
+}
+
+TEST_F(FlatPackageWriting, BehindTrailersThatAreTooManyToBeReadNothingIsWritten) {
+    const std::string large(kMaximumUnknownTrailers, 'x');
+    for (const PackageBuilder& before : {PackageBuilder().terminator().ticket("OLD").unknown(large),
+                                         PackageBuilder().terminator().unknown(large)}) {
+        put(before);
+        PWHashedFlatPackage fresh(url, platform.services());
+        const MessageCapture output(kVerbosityVerbose);
+        EXPECT_FALSE(fresh.writeNewTicketDataFromURL(source, nullptr));
+        EXPECT_EQ(fresh.appropriateExitCode(), 73);
+        EXPECT_THAT(
+            output.lines().back(),
+            StartsWith("Cannot add a new ticket to Sample.pkg. Error Domain=POSIXErrorDomain Code=27 "));
+        EXPECT_TRUE(contents() == before.build());
+        EXPECT_THAT(platform.files.changes(), IsEmpty());
+    }
+}
+
+TEST_F(FlatPackageWriting, OverATicketThatIsTooLongToBeReadNothingIsWritten) {
+    const PackageBuilder before = PackageBuilder().terminator().ticket(std::string(kMaximumTicket + 1, 'x'));
+    put(before);
+    EXPECT_FALSE(staple());
+    EXPECT_EQ(package.appropriateExitCode(), 73);
+    EXPECT_TRUE(contents() == before.build());
+    EXPECT_THAT(platform.files.changes(), IsEmpty());
 }
 
 TEST_F(FlatPackageWriting, AnEmptyFileIsStapledLikeAnyOther) {
