@@ -1,0 +1,36 @@
+# What the tests of checks share: faults are put into a copy of what is checked, and the check has to name each of them.
+# Sourced, after `set -euo pipefail`; makes the folder for the copy, and takes it away at the end.
+
+# shellcheck source=../support/outcomes.bash
+. "$(dirname "${BASH_SOURCE[0]}")/../support/outcomes.bash"
+
+copy=$(mktemp -d)
+trap 'rm -rf "$copy"' EXIT
+complaints=()
+
+# spoil FILE EDIT COMPLAINT: edits a file of the copy, and what must be said of that.
+spoil() {
+  local before
+  before=$(cat "$copy/$1")
+  sed -i -E "$2" "$copy/$1"
+  [ "$before" != "$(cat "$copy/$1")" ] || fail "$1: nothing to edit by $2"
+  complaints+=("$3")
+}
+
+# expect_silence COMMAND...: the check has nothing to say against the copy as it stands.
+expect_silence() {
+  local said
+  said=$("$@" 2>&1) || fail "complains without a cause: $said"
+}
+
+# expect_complaints COMMAND...: the check ends with 1, and with every complaint that is due since it was asked last.
+expect_complaints() {
+  local status=0 said complaint
+  [ ${#complaints[@]} -gt 0 ] || fail "nothing has been spoilt"
+  said=$("$@" 2>&1) || status=$?
+  [ $status -eq 1 ] || fail "exit status $status: $said"
+  for complaint in "${complaints[@]}"; do
+    grep -qF -- "$complaint" <<< "$said" || fail "\"$complaint\" is not said in: $said"
+  done
+  complaints=()
+}
