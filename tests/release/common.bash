@@ -13,8 +13,14 @@ subcommands_in_help() {
   sed -n '/^Subcommands:/,$p' | sed -nE 's/^  ([a-z]+) .*/\1/p'
 }
 
-# same WHAT EXPECTED GOT: two lists of one entry a line hold the same.
+# same WHAT EXPECTED GOT: two lists of one entry a line hold the same, and something.
 same() {
+  [ -n "$2" ] || fail "$1: none found"
+  same_or_none "$@"
+}
+
+# same_or_none WHAT EXPECTED GOT: the same, where there may be none.
+same_or_none() {
   local difference
   difference=$(diff <(sort -u <<< "$2") <(sort -u <<< "$3")) || fail "$1 (< expected, > found):"$'\n'"$difference"
 }
