@@ -1,8 +1,8 @@
 # What the tests of checks share: faults are put into a copy of what is checked, and the check has to name each of them.
 # Sourced, after `set -euo pipefail`; makes the folder for the copy, and takes it away at the end.
 
-# shellcheck source=../support/outcomes.bash
-. "$(dirname "${BASH_SOURCE[0]}")/../support/outcomes.bash"
+# shellcheck source=outcomes.bash
+. "$(dirname "${BASH_SOURCE[0]}")/outcomes.bash"
 
 copy=$(mktemp -d)
 trap 'rm -rf "$copy"' EXIT
