@@ -17,8 +17,8 @@ spoil() {
   complaints+=("$3")
 }
 
-# expect_silence COMMAND...: the check has nothing to say against the copy as it stands.
-expect_silence() {
+# expect_success COMMAND...: the check has nothing against the copy as it stands.
+expect_success() {
   local said
   said=$("$@" 2>&1) || fail "complains without a cause: $said"
 }
@@ -33,4 +33,11 @@ expect_complaints() {
     grep -qF -- "$complaint" <<< "$said" || fail "\"$complaint\" is not said in: $said"
   done
   complaints=()
+}
+
+# stand_in FILE LINE...: a shell script in the copy, in the place of a program that is not to be run.
+stand_in() {
+  mkdir -p "$(dirname "$copy/$1")"
+  printf '%s\n' '#!/bin/sh' "${@:2}" > "$copy/$1"
+  chmod +x "$copy/$1"
 }
