@@ -223,9 +223,12 @@ TEST_F(LargeTicket, AnAssetThatIsNotServedOverHTTPSParksTheRun) {
 }
 
 TEST_F(LargeTicket, AnAssetBeyondMeasureParksTheRun) {
-    service().enqueue(Script().respond(answer(assetRecord(service().url("/${f}"), 68719476736))));
-    service().enqueue(
-        Script().readRequest().send("HTTP/1.1 200 OK\r\nContent-Length: 68719476736\r\n\r\n").drain());
+    constexpr std::size_t kTooMuch = 64UL * 1024 * 1024 + 1;
+    service().enqueue(Script().respond(answer(assetRecord(service().url("/${f}"), kTooMuch))));
+    service().enqueue(Script()
+                          .readRequest()
+                          .send("HTTP/1.1 200 OK\r\nContent-Length: " + std::to_string(kTooMuch) + "\r\n\r\n")
+                          .drain());
     expectParked(DownloadFailed());
 }
 

@@ -106,6 +106,36 @@ TEST(OpaqueCodeDirectory, OfMoreThan32BitsHasTheLongForm) {
     EXPECT_EQ(layOutOpaqueCodeDirectory({"ADHOC", 0x100000000, std::nullopt, content}), expected);
 }
 
+TEST(OpaqueCodeDirectory, OfAnImageOfMoreThan32BitsHasTheLongFormAndTheTrailersSlot) {
+    const Data content(32, std::byte{0xC0});
+    const Data trailer(32, std::byte{0x7D});
+    const Data expected = ByteWriter()
+                              .be32(0xFADE0C02)
+                              .be32(64 + 6 + 7 * 32)
+                              .be32(0x20300)
+                              .be32(2)
+                              .be32(64 + 6 + 6 * 32)
+                              .be32(64)
+                              .be32(6)
+                              .be32(1)
+                              .be32(0xFFFFFFFF)
+                              .u8(32)
+                              .u8(2)
+                              .be16(0)
+                              .be64(0)  // spare and scatter offset
+                              .be64(0)  // team offset and spare
+                              .be64(0x100000000)
+                              .text("ADHOC")
+                              .u8(0)
+                              .bytes(trailer)
+                              .zeros(3 * 32)
+                              .bytes(kEmptyRequirementsDigest)
+                              .zeros(32)
+                              .bytes(content)
+                              .data();
+    EXPECT_EQ(layOutOpaqueCodeDirectory({"ADHOC", 0x100000000, trailer, content}), expected);
+}
+
 TEST(OpaqueCodeDirectory, KeepsTheShortFormUpToTheLast32BitLimit) {
     const Data content(32, std::byte{0xC0});
     EXPECT_EQ(layOutOpaqueCodeDirectory({"ADHOC", 0xFFFFFFFF, std::nullopt, content}),

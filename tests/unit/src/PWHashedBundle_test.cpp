@@ -154,12 +154,13 @@ TEST_F(Bundle, WithoutAContentsDirectoryFailsAtTheRemoval) {
 
 TEST_F(Bundle, AnOldTicketThatCannotBeRemovedStays) {
     test::writeFile(ticketPath(), std::string_view("OLD"));
+    platform.files.fail("copyContents", EIO);
     platform.files.fail("removeItem", EACCES);
     std::optional<Error> error;
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_FALSE(bundle.writeNewTicketDataFromURL(source(), &error));
     EXPECT_EQ(output.text().find("Could not remove existing ticket from " + ticketURL().absoluteString() +
-                                 " because an error occurred. "),
+                                 " because an error occurred. Error Domain=POSIXErrorDomain Code=13 "),
               0U);
     EXPECT_EQ(bundle.appropriateExitCode(), 73);
     EXPECT_EQ(error->code(), EACCES);
@@ -173,7 +174,7 @@ TEST_F(Bundle, ASecondCopyThatFailsLeavesNoTicket) {
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_FALSE(bundle.writeNewTicketDataFromURL(source(), &error));
     EXPECT_EQ(output.text().find("Could not save ticket to " + ticketURL().absoluteString() +
-                                 " because an error occurred. "),
+                                 " because an error occurred. Error Domain=POSIXErrorDomain Code=28 "),
               0U);
     EXPECT_EQ(bundle.appropriateExitCode(), 73);
     EXPECT_EQ(error->code(), ENOSPC);
@@ -183,9 +184,18 @@ TEST_F(Bundle, ASecondCopyThatFailsLeavesNoTicket) {
 TEST_F(Bundle, DeletingMovesTheTicketToTheTrashAndSaysWhere) {
     test::writeFile(ticketPath(), std::string_view("OLD"));
     bundle.setAppropriateExitCode(42);
+    platform.files.answerTrash(platform.directory.url("trash/CodeResources"));
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_TRUE(bundle._deleteExistingTicket());
-    EXPECT_EQ(output.text().find("Successfully moved ticket to trash. Find it at file://"), 0U);
+    EXPECT_EQ(output.lines(),
+              std::vector<std::string>{"Successfully moved ticket to trash. Find it at " +
+                                       platform.directory.url("trash/CodeResources").absoluteString()});
+}
+
+TEST_F(Bundle, DeletingLeavesNoTicketAndTheCodeAsItWas) {
+    test::writeFile(ticketPath(), std::string_view("OLD"));
+    bundle.setAppropriateExitCode(42);
+    EXPECT_TRUE(bundle._deleteExistingTicket());
     EXPECT_FALSE(std::filesystem::exists(ticketPath()));
     EXPECT_EQ(bundle.appropriateExitCode(), 42);
 }
@@ -195,9 +205,9 @@ TEST_F(Bundle, DeletingATicketThatCannotBeTrashedFailsAndKeepsIt) {
     platform.files.fail("trashItem", EPERM);
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_FALSE(bundle._deleteExistingTicket());
-    EXPECT_EQ(
-        output.text().find("Could not delete ticket " + ticketURL().absoluteString() + ". Error Domain="),
-        0U);
+    EXPECT_EQ(output.text().find("Could not delete ticket " + ticketURL().absoluteString() +
+                                 ". Error Domain=POSIXErrorDomain Code=1 "),
+              0U);
     EXPECT_EQ(test::readFile(ticketPath()), "OLD");
 }
 

@@ -263,6 +263,16 @@ TEST_F(DiskImage, WithMoreBlobsThanFitIsRefusedWithTheBoundFirstAndTheCountLast)
                      "2 blobs in image.dmg exceeds the maximum possible number of blobs, 3"}));
 }
 
+TEST_F(DiskImage, ShowsTheUppermostLengthsAndCountsAsTheMessagesHaveThem) {
+    constexpr std::uint32_t kAll = 0xFFFFFFFF;
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(SuperBlobBuilder().count(kAll)), 66),
+              (Lines{codesignLine(1000, 12), "Stored Codesign length: 12 number of blobs: -1",
+                     "0 blobs in image.dmg exceeds the maximum possible number of blobs, -1"}));
+    EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(SuperBlobBuilder().length(kAll)), 66),
+              (Lines{codesignLine(1000, 12), "Stored Codesign length: 4294967295 number of blobs: 0",
+                     "The code signature block must be 12 bytes in length. However, it is -1."}));
+}
+
 TEST_F(DiskImage, WhoseSuperblobStatesAnotherLengthIsRefused) {
     EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(SuperBlobBuilder().length(13)), 66),
               (Lines{codesignLine(1000, 12), "Stored Codesign length: 13 number of blobs: 0",
@@ -443,6 +453,17 @@ TEST_F(DiskImage, SignedTakesHashAndAlgorithmFromItsCodeSignature) {
     EXPECT_EQ(image.cdHash(), Data(48, std::byte{0xAB}));
     EXPECT_EQ(image.digestAlgorithm(), 4U);
     EXPECT_EQ(output.lines().front(), "Props are {");
+}
+
+TEST_F(DiskImage, WhoseSignatureNamesNoAlgorithmHasNumber0) {
+    platform.codeSigning.validity = codesign::kSuccess;
+    platform.codeSigning.information.emplace();
+    platform.codeSigning.information->unique = Data(20, std::byte{0xAB});
+    put(DiskImageBuilder().superblob(DiskImageBuilder::signature()));
+    auto image = open();
+    image.setDigestAlgorithm(7);
+    EXPECT_EQ(image.cdHash(), Data(20, std::byte{0xAB}));
+    EXPECT_EQ(image.digestAlgorithm(), 0U);
 }
 
 TEST_F(DiskImage, UnsignedAnswersTheHashMadeWhileReading) {

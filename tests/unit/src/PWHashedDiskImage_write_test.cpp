@@ -292,6 +292,31 @@ TEST_F(DiskImageWriting, RefusesATicketOf4GiB) {
     expectFailedWith73AndUntouched(DiskImageBuilder());
 }
 
+TEST_F(DiskImageWriting, NamesTheTargetThatItWritesAndNotTheFileThatWasRead) {
+    put(DiskImageBuilder().superblob(signedAndStapled("A MUCH LONGER TICKET")));
+    auto image = open();
+    std::filesystem::copy_file(url.path(), directory / "clone.dmg");
+    const URL clone = directory.url("clone.dmg");
+    const auto saidOf = [&](const std::optional<URL>& from, bool deleteExisting) {
+        const MessageCapture output(kVerbosityVerbose);
+        image._writeNewTicketDataFromURL(from, clone, deleteExisting, nullptr);
+        return output.lines();
+    };
+    EXPECT_EQ(saidOf(std::nullopt, false), Lines{"Cannot add a new ticket to clone.dmg. (null)"});
+    test::writeFile(source.path(), std::string_view("T"));
+    EXPECT_EQ(saidOf(source, false).back().find("Truncating clone.dmg from to "), 0U);
+    platform.files.fail("handle.write", EIO);
+    EXPECT_EQ(
+        saidOf(source, false).back().find("Fatal error while writing new ticket to " + clone.path() + ". "),
+        0U);
+    EXPECT_EQ(saidOf(std::nullopt, true)
+                  .back()
+                  .find("Fatal error while deleting existing ticket to " + clone.path() + ". "),
+              0U);
+    platform.files.fail("openForUpdating", EROFS);
+    EXPECT_EQ(saidOf(source, false).back(), "All that work and I can't open clone.dmg for writing.");
+}
+
 TEST_F(DiskImageWriting, IgnoresTheSourceWhenDeleting) {
     EXPECT_TRUE(run(DiskImageBuilder().superblob(signedAndStapled("TICKET")), directory.url("none"), true));
     EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(DiskImageBuilder::signature())));

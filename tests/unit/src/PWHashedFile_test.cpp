@@ -265,8 +265,9 @@ TEST_F(SafeReplacement, WithoutAReplacementDirectoryWritesInPlace) {
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_TRUE(staple());
     EXPECT_TRUE(wroteInPlace());
-    EXPECT_EQ(
-        output.lines()[1].find("Could not create replacement directory for " + path + ". Error Domain="), 0U);
+    EXPECT_EQ(output.lines()[1].find("Could not create replacement directory for " + path +
+                                     ". Error Domain=POSIXErrorDomain Code=13 "),
+              0U);
     EXPECT_EQ(platform.files.count("replaceItem"), 0U);
 }
 
@@ -275,7 +276,9 @@ TEST_F(SafeReplacement, WhenTheCopyFailsWritesInPlaceAndSwapsNothing) {
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_TRUE(staple());
     EXPECT_TRUE(wroteInPlace());
-    EXPECT_EQ(output.lines()[1].find("Could not copy backup to " + path + ". Error Domain="), 0U);
+    EXPECT_EQ(output.lines()[1].find("Could not copy backup to " + path +
+                                     ". Error Domain=POSIXErrorDomain Code=28 "),
+              0U);
     EXPECT_EQ(platform.files.count("replaceItem"), 0U);
 }
 
@@ -315,7 +318,8 @@ TEST_F(SafeReplacement, AFailedSwapAnswersYesKeepsTheCodeAndHandsOutTheError) {
     EXPECT_EQ(test::readFile(path), "OLD");
     EXPECT_EQ(test::readFile(file.writtenTarget->path()), "NEW");
     EXPECT_EQ(output.lines()[2].find("Could not replace " + path + " with the safetly modified file at " +
-                                     file.writtenTarget->absoluteString() + ". Error Domain="),
+                                     file.writtenTarget->absoluteString() +
+                                     ". Error Domain=POSIXErrorDomain Code=16 "),
               0U);
     EXPECT_EQ(platform.files.count("trashItem"), 0U);
 }

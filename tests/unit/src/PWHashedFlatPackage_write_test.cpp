@@ -225,6 +225,30 @@ TEST_F(FlatPackageWriting, NoTicketFileAtAllIsRefused) {
     EXPECT_EQ(platform.files.count("openForReading"), 0U) << "refused before the trailers are looked at";
 }
 
+TEST_F(FlatPackageWriting, NamesTheTargetThatItWritesAndNotTheFileThatWasRead) {
+    put(PackageBuilder().terminator().ticket("A MUCH LONGER OLD TICKET"));
+    const foundation::URL clone = platform.directory.url("Clone.pkg");
+    std::filesystem::copy_file(path, clone.path());
+    const auto saidOf = [&](const std::optional<foundation::URL>& from, bool deleteExisting) {
+        const MessageCapture output(kVerbosityVerbose);
+        package._writeNewTicketDataFromURL(from, clone, deleteExisting, nullptr);
+        return output.lines().back();
+    };
+    EXPECT_EQ(saidOf(std::nullopt, false), "Cannot add a new ticket to Clone.pkg. (null)");
+    EXPECT_THAT(saidOf(source, false), StartsWith("Truncating Clone.pkg from to "));
+    platform.files.fail("handle.write", EIO);
+    EXPECT_THAT(saidOf(source, false),
+                StartsWith("Fatal error while writing new ticket to " + clone.path() + ". "));
+    platform.files.fail("openForUpdating", EACCES);
+    EXPECT_THAT(saidOf(source, false), StartsWith("Could not create file handle to " + clone.path() + ". "));
+
+    put(PackageBuilder());
+    PWHashedFlatPackage bare(url, platform.services());
+    const MessageCapture output(kVerbosityVerbose);
+    bare._writeNewTicketDataFromURL(std::nullopt, clone, true, nullptr);
+    EXPECT_EQ(output.lines().back(), "Cannot delete an existing ticket in Clone.pkg that doesn't exist.");
+}
+
 TEST_F(FlatPackageWriting, ATargetThatCannotBeOpenedIsReportedWithItsError) {
     put(PackageBuilder());
     platform.files.fail("openForUpdating", EACCES);

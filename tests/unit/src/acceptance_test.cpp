@@ -50,6 +50,13 @@ TEST_F(Acceptance, AGenuineTicketThatListsTheFileIsAccepted) {
     EXPECT_FALSE(file->revoked());
 }
 
+TEST_F(Acceptance, ADownloadedTicketIsJudgedFromMemoryNotFromTheFileItWasWrittenTo) {
+    platform.files.fail("contentsOfFile", EIO);
+    controller->setOperation(kOperationValidate);
+    controller->writeDownloadedData(unsignedTicket({hash(0xAB)}), nullptr);
+    EXPECT_EQ(file->appropriateExitCode(), 0);
+}
+
 TEST_F(Acceptance, AMissingTicketIsRefusedWith65AndInSilence) {
     const MessageCapture output(kVerbosityNormal);
     EXPECT_FALSE(controller->isValidTicketData(std::nullopt));

@@ -108,6 +108,17 @@ TEST_F(BasicCodeProperties, AreEmptyAndLoggedWhenNoInformationComesBack) {
     EXPECT_EQ(platform.systemLog.entries()[0], "Unable to copy signing information from code reference.");
 }
 
+TEST_F(BasicCodeProperties, LogTheSameHoweverLoudTheRunIs) {
+    platform.codeSigning.copyStatus = -67030;
+    for (const std::uint8_t verbosity : {kVerbosityQuiet, kVerbosityNormal, kVerbosityVerbose}) {
+        const std::size_t before = platform.systemLog.entries().size();
+        const test::MessageCapture output(verbosity);
+        properties();
+        EXPECT_EQ(platform.systemLog.entries().size(), before + 1);
+        EXPECT_EQ(output.text(), "");
+    }
+}
+
 TEST_F(BasicCodeProperties, AreEmptyAndLoggedWithoutAUniqueHash) {
     platform.codeSigning.information->unique.reset();
     EXPECT_EQ(properties(), Value(Dictionary{}));

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <array>
+#include <set>
 
 #include "types/type_service.h"
 
@@ -51,6 +52,34 @@ TEST_F(FileKind, OnlyTheUDIFDiskImageTypeIsADiskImage) {
 
 TEST_F(FileKind, AGenericBundleNamedKEXTInCapitalsIsABundleByItsExtension) {
     EXPECT_EQ(classOf("com.ostrel.generic-bundle", "KEXT"), AssessmentClass::bundle);
+}
+
+TEST_F(FileKind, AGenericPackageIsABundleByItsExtensionAlone) {
+    EXPECT_EQ(classOf("com.ostrel.package", "kext"), AssessmentClass::bundle);
+    EXPECT_EQ(classOf("com.ostrel.package", "rtfd"), AssessmentClass::unknown);
+}
+
+/// Its only type conforms to all that the test says, which no type of the platform does.
+class ManifoldType final : public types::TypeService {
+  public:
+    explicit ManifoldType(std::set<std::string_view> all) : all_(std::move(all)) {}
+    std::string typeIdentifier(const types::Item&) override { return "manifold"; }
+    std::string localizedDescription(const types::Item&) override { return "manifold"; }
+    bool conforms(std::string_view, std::string_view to) override { return all_.contains(to); }
+    bool isDynamic(std::string_view) override { return false; }
+
+  private:
+    std::set<std::string_view> all_;
+};
+
+TEST(FileKindOfManyTypes, IsAPackageBeforeABundleAndABundleBeforeADiskImage) {
+    ManifoldType everything(
+        {"com.ostrel.installer-package", "com.ostrel.application", "com.ostrel.disk-image-udif"});
+    EXPECT_EQ(assessmentClassForUTI(everything, "manifold", "dmg"), AssessmentClass::package);
+    ManifoldType executableImage({"public.unix-executable", "com.ostrel.disk-image-udif"});
+    EXPECT_EQ(assessmentClassForUTI(executableImage, "manifold", "dmg"), AssessmentClass::bundle);
+    ManifoldType bundledImage({"com.ostrel.disk-image-udif", "com.ostrel.bundle"});
+    EXPECT_EQ(assessmentClassForUTI(bundledImage, "manifold", "kext"), AssessmentClass::diskImage);
 }
 
 TEST_F(FileKind, ADynamicTypeWithExtensionKextIsABundleThoughItConformsToNothing) {

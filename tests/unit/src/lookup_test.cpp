@@ -140,6 +140,21 @@ TEST_F(Lookup, WithoutAFileURLEndsWith66BeforeTheNetwork) {
     EXPECT_EQ(file->appropriateExitCode(), 66);
 }
 
+TEST_F(Lookup, WithoutEitherSaysBoth) {
+    struct Nothing : PWHashedFile {
+        using PWHashedFile::PWHashedFile;
+        std::optional<Data> _cdHash() override { return std::nullopt; }
+    };
+    const auto file = std::make_shared<Nothing>(std::nullopt, run.platform.services());
+    DownloadDelegate controller(file, run.platform.services());
+    const MessageCapture output(kVerbosityVerbose);
+    EXPECT_FALSE(controller.grabTicket());
+    EXPECT_EQ(output.lines(), (std::vector<std::string>{
+                                  "Cannot download ticket. CDHash must be set.",
+                                  "Cannot download ticket. File Path is required for the given CDHash."}));
+    EXPECT_EQ(file->appropriateExitCode(), 66);
+}
+
 TEST_F(Lookup, ValidateOfAFileWithoutATicketEndsWith65BeforeTheNetwork) {
     const MessageCapture output(kVerbosityNormal);
     EXPECT_FALSE(grab(kOperationValidate));
@@ -304,6 +319,31 @@ TEST_F(Lookup, AnInlineTicketThatIsNoBase64IsNoTicketAndNoException) {
     const MessageCapture output(kVerbosityNormal);
     EXPECT_EQ(run.answer(R"({"records":[{"fields":{"signedTicket":{"value":"not base64!"}}}]})"), 65);
     EXPECT_EQ(output.lines(), (std::vector<std::string>{noTicketLine, failedStapleLine}));
+}
+
+TEST_F(Lookup, AnInlineTicketThatIsNoBase64StartsNoDownload) {
+    ASSERT_TRUE(grab());
+    EXPECT_EQ(run.answer(R"({"records":[{"fields":{"signedTicket":{"value":"not base64!"},
+                            "signedTicketAsset":{"value":{"downloadURL":"https://a.example/","size":7}}}}]})"),
+              65);
+    EXPECT_EQ(run.platform.https.sessions.size(), 1U);
+}
+
+TEST_F(Lookup, AnAssetOfTheWrongShapeSpoilsAnInlineTicketButItsURLIsNotLookedAt) {
+    const std::string ticket = foundation::encodeBase64(unsignedTicket({ControllerRun::fileHash()}));
+    const auto withAsset = [&](const std::string& asset) {
+        return R"({"records":[{"fields":{"signedTicket":{"value":")" + ticket +
+               R"("},"signedTicketAsset":{"value":)" + asset + "}}}]}";
+    };
+    ASSERT_TRUE(grab());
+    EXPECT_EQ(run.answer(withAsset(R"({"downloadURL":7})")), 0);
+
+    ControllerRun another;
+    another.controller.setOperation(kOperationStaple);
+    ASSERT_TRUE(another.controller.grabTicket());
+    const MessageCapture output(kVerbosityNormal);
+    EXPECT_EQ(another.answer(withAsset(R"("text")")), 65);
+    EXPECT_EQ(output.lines(), (std::vector<std::string>{badShapeLine, noTicketLine, failedStapleLine}));
 }
 
 TEST_F(Lookup, AnInlineTicketWithLineBreaksIsNoTicket) {

@@ -34,13 +34,15 @@ class SyntheticCDHash : public testing::Test {
     }
 
     void expectNothingStored() const {
-        EXPECT_EQ(algorithm, 0U);
-        EXPECT_EQ(hash, std::nullopt);
+        EXPECT_EQ(algorithm, kBefore);
+        EXPECT_EQ(hash, Data{std::byte{7}});
     }
 
+    static constexpr std::uint32_t kBefore = 7;
+
     test::TestPlatform platform;
-    std::uint32_t algorithm = 0;
-    std::optional<Data> hash;
+    std::uint32_t algorithm = kBefore;
+    std::optional<Data> hash = Data{std::byte{7}};
     Lines lines;
 };
 
