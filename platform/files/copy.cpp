@@ -116,6 +116,7 @@ Result<void> copyFileContents(const std::string& source, const std::string& dest
     if (auto done = copyContents(*from, *to); !done) return done;
     if (auto done = flush(to->number(), destination); !done) return done;
     if (auto done = closeReporting(*to); !done) return done;
+    if (auto done = flushDirectoryOf(destination); !done) return done;
     halfMade.keep();
     return {};
 }

@@ -140,8 +140,8 @@ class FileManager {
     virtual Result<void> copyItem(const URL& source, const URL& destination) = 0;
 
     /// A new file at `destination`, which must not exist, with the source's bytes and nothing else of it:
-    /// mode and owner are those of any file newly made there. On stable storage when this returns. A failed
-    /// copy leaves nothing there. Regular files only.
+    /// mode and owner are those of any file newly made there. On stable storage, its name too, when this returns. A
+    /// failed copy leaves nothing there. Regular files only.
     virtual Result<void> copyContents(const URL& source, const URL& destination) = 0;
 
     /// Removes a file, a link, or a directory with all that is in it; follows no link. What an error names is

@@ -106,6 +106,16 @@ Result<void> flush(int descriptor, const std::string& path) {
     return {};
 }
 
+Result<void> flushDirectoryOf(const std::string& path) {
+    const std::string directoryPath = directoryOf(path);
+    const auto directory = openDirectory(directoryPath, LastLink::followed);
+    if (!directory) return directory.error();
+    auto done = flush(directory->get(), directoryPath);
+    // EINVAL: a file system (of shared folders, say) that cannot flush directories, fsync(2).
+    if (!done && done.error().code() == EINVAL) return {};
+    return done;
+}
+
 Result<void> closeReporting(OpenFile& file) {
     // Never again after EINTR: on Linux the number is free by then, and may be another thread's new file.
     if (::close(file.descriptor.release()) != 0 && errno != EINTR) return lastError(file.path);

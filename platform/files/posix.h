@@ -97,6 +97,10 @@ Result<Data> readUpTo(const OpenFile& file, std::uint64_t length);
 /// Returns when what `descriptor` stands for is on stable storage.
 Result<void> flush(int descriptor, const std::string& path);
 
+/// The same for the directory that a path's last component stands in, and so for the name of what was made
+/// there; no failure where the file system has no such thing.
+Result<void> flushDirectoryOf(const std::string& path);
+
 /// Closes and reports what the file system has kept back until now.
 Result<void> closeReporting(OpenFile& file);
 

@@ -79,10 +79,7 @@ Result<void> writeFilePlainly(ByteView contents, const std::string& path) {
     HalfMadeFile halfMade(path);
     if (auto done = fill(*file, contents); !done) return done;
     if (auto done = closeReporting(*file); !done) return done;
-    const std::string directoryPath = directoryOf(path);
-    const auto directory = openDirectory(directoryPath, LastLink::followed);
-    if (!directory) return directory.error();
-    if (auto done = flush(directory->get(), directoryPath); !done) return done;
+    if (auto done = flushDirectoryOf(path); !done) return done;
     halfMade.keep();
     return {};
 }

@@ -12,6 +12,7 @@
 #include <cerrno>
 #include <cstdarg>
 #include <ctime>
+#include <filesystem>
 #include <utility>
 
 namespace pinwell::test {
@@ -130,6 +131,10 @@ void Trouble::noteOpening(int flags) {
     if ((flags & O_CLOEXEC) == 0) ++inheritable_;
 }
 
+void Trouble::noteFlush(int file) {
+    flushed_.push_back(std::filesystem::read_symlink("/proc/self/fd/" + std::to_string(file)));
+}
+
 }  // namespace pinwell::test
 
 // The linker's names; each does what its call does, or fails.
@@ -172,7 +177,6 @@ PINWELL_WRAP(int, -1, fremovexattr, (int file, const char* name), (file, name))
 PINWELL_WRAP(int, -1, fsetxattr, (int file, const char* name, const void* value, size_t size, int flags),
              (file, name, value, size, flags))
 PINWELL_WRAP(int, -1, fstat, (int file, struct stat* status), (file, status))
-PINWELL_WRAP(int, -1, fsync, (int file), (file))
 PINWELL_WRAP(int, -1, ftruncate, (int file, off_t length), (file, length))
 PINWELL_WRAP(int, -1, futimens, (int file, const timespec* times), (file, times))
 PINWELL_WRAP(off_t, -1, lseek, (int file, off_t distance, int from), (file, distance, from))
@@ -215,6 +219,15 @@ int __wrap_close(int file) {
     __real_close(file);
     errno = reason;
     return -1;
+}
+
+int __real_fsync(int file);
+int __wrap_fsync(int file);
+int __wrap_fsync(int file) {
+    if (fails("fsync")) return -1;
+    const int answer = __real_fsync(file);
+    if (answer == 0 && current != nullptr) current->noteFlush(file);
+    return answer;
 }
 
 int __real_mkostemp(char* pattern, int flags);

@@ -14,6 +14,7 @@
 #include <set>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace pinwell::test {
 
@@ -51,10 +52,14 @@ class Trouble {
     std::size_t callCount() const noexcept { return calls_; }
     std::size_t openedWithoutCloseOnExec() const noexcept { return inheritable_; }
 
+    /// The paths of what has been flushed to stable storage, in order.
+    const std::vector<std::string>& flushed() const noexcept { return flushed_; }
+
     // For the calls themselves.
     bool fails(const std::string& name);
     bool isShort() const noexcept;
     void noteOpening(int flags);
+    void noteFlush(int file);
 
   private:
     enum class Kind { none, atCall, shortAtCall, fromCallOn, atEvery, interruptions, shortCounts };
@@ -68,6 +73,7 @@ class Trouble {
     std::size_t inheritable_ = 0;
     std::string failedCall_;
     std::string interrupted_;
+    std::vector<std::string> flushed_;
 };
 
 }  // namespace pinwell::test

@@ -3,6 +3,7 @@
 #include "support/failing_calls.h"
 
 #include <cerrno>
+#include <cstring>
 #include <filesystem>
 #include <functional>
 #include <set>
@@ -21,6 +22,7 @@ using testing::AnyOf;
 using testing::Contains;
 using testing::ElementsAre;
 using testing::IsSubsetOf;
+using testing::StartsWith;
 
 constexpr const char* kAccessControlList = "system.posix_acl_access";
 
@@ -221,6 +223,51 @@ TEST_F(FailingCalls, InAPlainWriteLeaveAWholeNewFileOrNone) {
         });
     EXPECT_THAT((std::set<std::string>{"open", "fstat", "fchmod", "write", "fsync", "close"}),
                 IsSubsetOf(calls));
+}
+
+// A flush of the file alone would leave its name to chance.
+TEST_F(FailingCalls, OrNotANewFileIsFlushedAndThenItsDirectory) {
+    const URL original = url("folder/original");
+    struct Row {
+        const char* way;
+        std::function<foundation::Result<void>(const URL&)> make;
+    };
+    const std::vector<Row> rows{
+        {"written plainly",
+         [&](const URL& file) {
+             return manager->writeFile(asBytes("x"), file, FileManager::Writing::plain);
+         }},
+        {"written atomically",
+         [&](const URL& file) {
+             return manager->writeFile(asBytes("x"), file, FileManager::Writing::atomic);
+         }},
+        {"copied", [&](const URL& file) { return manager->copyContents(original, file); }},
+        {"put in another's place", [&](const URL& file) { return manager->replaceItem(original, file); }},
+    };
+    for (const Row& row : rows) {
+        SCOPED_TRACE(row.way);
+        clear();
+        writeFile(original.path(), "contents");
+        const bool replaces = &row == &rows.back();
+        if (replaces) writeFile(path("folder/file"), "replacement");
+        const Trouble trouble = Trouble::none();
+        ASSERT_THAT(row.make(url("folder/file")), Succeeds());
+        EXPECT_THAT(trouble.flushed(), ElementsAre(StartsWith(path("folder/")), path("folder")));
+    }
+}
+
+TEST_F(FailingCalls, InTheFlushOfADirectoryMeanNothingWhereItsFileSystemKnowsNone) {
+    for (const auto& [reason, status] : {std::pair{EINVAL, true}, {EIO, false}}) {
+        std::size_t flushes = 0;
+        for (std::size_t number = 0; flushes < 2; ++number) {
+            clear();
+            const Trouble trouble = Trouble::atCall(number, reason);
+            const auto done = manager->writeFile(asBytes("x"), url("file"), FileManager::Writing::plain);
+            ASSERT_FALSE(trouble.failedCall().empty());
+            if (trouble.failedCall() != "fsync" || ++flushes == 1) continue;
+            EXPECT_EQ(done.has_value(), status) << strerror(reason);
+        }
+    }
 }
 
 TEST_F(FailingCalls, InAnOverwriteComeOut) {
