@@ -140,8 +140,8 @@ class FileManager {
     virtual Result<void> copyItem(const URL& source, const URL& destination) = 0;
 
     /// A new file at `destination`, which must not exist, with the source's bytes and nothing else of it:
-    /// mode and owner are those of any file newly made there. On stable storage, its name too, when this returns. A
-    /// failed copy leaves nothing there. Regular files only.
+    /// mode and owner are those of any file newly made there. On stable storage, its name too, when this
+    /// returns. A failed copy leaves nothing there. Regular files only.
     virtual Result<void> copyContents(const URL& source, const URL& destination) = 0;
 
     /// Removes a file, a link, or a directory with all that is in it; follows no link. What an error names is
@@ -157,8 +157,8 @@ class FileManager {
     virtual Result<void> replaceItem(const URL& original, const URL& replacement) = 0;
 
     /// Moves the item (a link itself) to the user's freedesktop.org trash, the volume's own where it is not
-    /// the home directory's; answers where it is now. What is beneath the error is the user information's
-    /// underlying error.
+    /// the home directory's; answers where it is now. An error leaves it where it was, except when it is
+    /// where it went that cannot be told; what is beneath is the user information's underlying error.
     virtual Result<URL> trashItem(const URL& item) = 0;
 
     /// The whole of a regular file of at most kMaximumWholeFile bytes (EFBIG). Follows no link in the last

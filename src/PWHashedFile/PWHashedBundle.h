@@ -23,7 +23,8 @@ class PWHashedBundle : public PWHashedFile {
 
     using PWHashedFile::_deleteExistingTicket;  // goes through the base's driver, and raises there
 
-    /// Moves the ticket file to the trash.
+    /// Moves the ticket file to the trash, whole; answers whether that went well. The exit code stays as it
+    /// is.
     bool _deleteExistingTicket();
 
     std::optional<Data> _ticketData() override;

@@ -8,12 +8,16 @@
 #include <filesystem>
 #include <functional>
 #include <iostream>
+#include <map>
 
 #include "foundation/format.h"
+#include "src/PWHashedFile/PWHashedBundle.h"
+#include "src/host_platform.h"
 #include "stapling.h"
 #include "support/environment.h"
 #include "support/executable_image_builder.h"
 #include "support/failing_calls.h"
+#include "support/message_capture.h"
 #include "support/package_builder.h"
 #include "support/process.h"
 #include "support/volume.h"
@@ -88,6 +92,7 @@ std::vector<Job> jobsFor(const Subject& subject) {
     std::vector<Job> jobs{{"staple", std::nullopt, longer},
                           {"restaple shorter", longer, shorter},
                           {"restaple longer", shorter, longer}};
+    // A bundle's ticket is deleted in another way: see DeletionFaults.
     if (!subject.isBundle) jobs.push_back({"delete", longer, std::nullopt});
     if (subject.afterWith) jobs.erase(jobs.begin());  // it has a ticket, or nothing is moved
     return jobs;
@@ -326,6 +331,118 @@ class WriteFaults : public testing::TestWithParam<const char*> {
                   << ", appended to in " << tally.appended << ", put right in " << tally.repaired << "\n";
     }
 };
+
+// A bundle's ticket goes to the trash as a file, which is no write.
+class DeletionFaults : public testing::Test {
+  protected:
+    struct Deletion {
+        bool done = false;
+        Outcome outcome;
+        std::string failedCall;
+    };
+
+    // `pinwell` has no operation for it: the tool's own services, and the bundle's own way to do it.
+    Deletion eraseWith(const std::function<Trouble()>& makeTrouble) const {
+        const MessageCapture output(kVerbosityVerbose);
+        const HostPlatform host([](int) {});
+        Deletion deletion;
+        {
+            const Trouble trouble = makeTrouble();
+            const auto file =
+                PWHashedFile::initWithFileURL(URL::fileURLWithPath(bundle_.path), host.services());
+            const auto bundle = std::dynamic_pointer_cast<PWHashedBundle>(file);
+            deletion.done = bundle != nullptr && bundle->_deleteExistingTicket();
+            deletion.outcome.status = file == nullptr ? kExitNoInput : file->appropriateExitCode();
+            deletion.failedCall = trouble.failedCall();
+        }
+        deletion.outcome.lines = output.lines();
+        return deletion;
+    }
+
+    void prepare() const {
+        std::filesystem::remove_all(trash());
+        writeFile(bundle_.file, ticket_);
+    }
+
+    // What the bundle consists of besides its ticket.
+    std::map<std::string, std::string> rest() const {
+        std::map<std::string, std::string> files;
+        for (const auto& entry : std::filesystem::recursive_directory_iterator(bundle_.path))
+            files[entry.path()] = entry.is_regular_file() ? readFile(entry.path()) : std::string();
+        files.erase(bundle_.file);
+        return files;
+    }
+
+    /// Whether it is in the bundle; otherwise it is in the trash.
+    bool isKeptWhole() const {
+        EXPECT_EQ(rest(), rest_);
+        const auto now = contentsOf(bundle_.file);
+        EXPECT_EQ(now.value_or(ticket_), ticket_);
+        std::vector<std::string> trashed;
+        if (std::filesystem::exists(trash() + "/files")) trashed = pathsIn(trash() + "/files", "");
+        EXPECT_EQ(trashed.size(), now ? 0U : 1U);
+        for (const std::string& path : trashed) EXPECT_EQ(readFile(path), ticket_);
+        return now.has_value();
+    }
+
+    static std::string trash() { return home() / "data/Trash"; }
+
+    static constexpr const char* kTrashed = "Successfully moved ticket to trash. Find it at file://";
+    static constexpr const char* kNotTrashed = "Could not delete ticket file://";
+
+  private:
+    // The trash's library reads its directories once in a process.
+    static const TemporaryDirectory& home() {
+        static const TemporaryDirectory directory;
+        return directory;
+    }
+
+    ScopedVariable homeVariable_{"HOME", home().path()};
+    ScopedVariable dataVariable_{"XDG_DATA_HOME", home() / "data"};
+    TemporaryDirectory directory_;
+
+  protected:
+    const Subject bundle_ = bundleIn(directory_.path());
+    const std::string ticket_ = foundation::toString(unsignedTicket({bundle_.hash}));
+    const std::map<std::string, std::string> rest_ = rest();
+};
+
+TEST_F(DeletionFaults, LeaveABundlesTicketWholeInItsPlaceOrInTheTrash) {
+    for (const Fault& fault : faults()) {
+        std::size_t number = 0;
+        for (std::string failed = "first"; !failed.empty(); ++number) {
+            prepare();
+            const Deletion deletion = eraseWith([&] { return fault.at(number); });
+            const Outcome& outcome = deletion.outcome;
+            failed = deletion.failedCall;
+            SCOPED_TRACE(foundation::format("%@ at call %lu, %@\n%@", fault.name, number, failed,
+                                            testing::PrintToString(outcome)));
+            if (isKeptWhole()) {
+                EXPECT_FALSE(deletion.done);
+                EXPECT_TRUE(outcome.status == kExitNoInput || outcome.says(kNotTrashed));
+            } else {
+                // Where it went is asked once it has gone.
+                EXPECT_TRUE(deletion.done || failed == "readlink");
+                EXPECT_TRUE(outcome.says(deletion.done ? kTrashed : kNotTrashed));
+            }
+            EXPECT_THAT(outcome.status, AnyOf(kExitOK, kExitNoInput));
+            EXPECT_TRUE(deletion.done || !failed.empty());
+            ASSERT_FALSE(HasFailure());
+        }
+        EXPECT_GT(number, 5U);
+    }
+}
+
+TEST_F(DeletionFaults, ThatAreTheTrashsOwnLeaveABundlesTicketInItsPlace) {
+    prepare();
+    writeFile(trash(), std::string_view("no directory"));
+    const Deletion deletion = eraseWith(&Trouble::none);
+    EXPECT_FALSE(deletion.done);
+    EXPECT_EQ(deletion.outcome.status, kExitOK);
+    EXPECT_TRUE(deletion.outcome.says(kNotTrashed));
+    EXPECT_EQ(readFile(bundle_.file), ticket_);
+    EXPECT_EQ(rest(), rest_);
+}
 
 const Data& sampleData() {
     static const Data data = irregularData(10'000);
