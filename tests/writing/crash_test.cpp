@@ -138,6 +138,31 @@ class Crash : InMemory, public EndToEndTest, public testing::WithParamInterface<
         }
     }
 
+    void interruptStapleOfBundle(int signal) {
+        if (const auto reason = missing()) GTEST_SKIP() << *reason;
+        const std::string moved = volume_ / "Sample.app";
+        std::filesystem::copy(bundle, moved, std::filesystem::copy_options::recursive);
+        bundle = moved;
+        const Data fresh = ticket();
+        for (const bool wasStapled : {false, true}) {
+            interruptEverywhere({.path = bundle,
+                                 .ticket = fresh,
+                                 .prepare =
+                                     [&] {
+                                         std::filesystem::remove(ticketPath());
+                                         if (wasStapled) stapleByHand(ticketForOthers());
+                                     },
+                                 .look = [&]() -> std::optional<std::string> {
+                                     if (const auto now = stapled()) return foundation::toString(*now);
+                                     return std::nullopt;
+                                 },
+                                 .after = foundation::toString(fresh),
+                                 .repair = [] {}},
+                                signal);
+            if (HasFailure()) return;
+        }
+    }
+
     // A server takes a limited number of connections.
     static constexpr std::size_t kRunsPerServer = 50;
 
@@ -220,28 +245,7 @@ TEST_P(Crash, LosesNoTrailersOfAPackage) {
 }
 
 TEST_P(Crash, LeavesABundleThatCanBeStapledAgain) {
-    if (const auto reason = missing()) GTEST_SKIP() << *reason;
-    const std::string moved = volume_ / "Sample.app";
-    std::filesystem::copy(bundle, moved, std::filesystem::copy_options::recursive);
-    bundle = moved;
-    const Data fresh = ticket();
-    for (const bool wasStapled : {false, true}) {
-        interruptEverywhere({.path = bundle,
-                             .ticket = fresh,
-                             .prepare =
-                                 [&] {
-                                     std::filesystem::remove(ticketPath());
-                                     if (wasStapled) stapleByHand(ticketForOthers());
-                                 },
-                             .look = [&]() -> std::optional<std::string> {
-                                 if (const auto now = stapled()) return foundation::toString(*now);
-                                 return std::nullopt;
-                             },
-                             .after = foundation::toString(fresh),
-                             .repair = [] {}},
-                            SIGKILL);
-        if (HasFailure()) return;
-    }
+    interruptStapleOfBundle(SIGKILL);
 }
 
 TEST_P(Crash, OfASignalThatCanWaitComesAfterTheImageIsWritten) {
@@ -250,6 +254,10 @@ TEST_P(Crash, OfASignalThatCanWaitComesAfterTheImageIsWritten) {
 
 TEST_P(Crash, OfASignalThatCanWaitComesAfterThePackageIsWritten) {
     interruptStapleOf(signedPackage(), SIGINT);
+}
+
+TEST_P(Crash, OfASignalThatCanWaitComesAfterTheBundlesTicketIsWritten) {
+    interruptStapleOfBundle(SIGHUP);
 }
 
 // Not the tool is interrupted, but its file changed under it.

@@ -153,6 +153,8 @@ class Trace {
         // Nothing but system calls from here on: other threads may have held any lock.
         const int nothing = open("/dev/null", O_RDWR);
         for (const int stream : {0, 1, 2}) dup2(nothing, stream);
+        // A test run in the background or under nohup(1) has handed down what it ignores.
+        for (const int number : {SIGHUP, SIGINT, SIGTERM}) std::signal(number, SIG_DFL);
         if (chdir(command.workingDirectory.c_str()) != 0 || ptrace(PTRACE_TRACEME, 0, nullptr, nullptr) != 0)
             _exit(127);
         raise(SIGSTOP);
