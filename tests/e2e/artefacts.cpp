@@ -6,6 +6,7 @@
 #include "support/archive_builder.h"
 #include "support/code_directory_builder.h"
 #include "support/disk_image_builder.h"
+#include "support/executable_image_builder.h"
 #include "support/file_properties.h"
 #include "support/package_builder.h"
 #include "support/temporary_directory.h"
@@ -58,6 +59,12 @@ TicketPayloadBuilder Artefact::payload() const {
     return TicketPayloadBuilder().entry(algorithm, hash);
 }
 
+std::string Artefact::kind() const {
+    std::string kind = name.substr(0, name.find('.'));
+    if (isBundle()) return kind + "Bundle";
+    return kind + (name.ends_with(".dmg") ? "Image" : "Package");
+}
+
 Data irregularData(std::size_t count) {
     return foundation::toData(irregularBytes(count));
 }
@@ -92,9 +99,21 @@ Artefact signedPackage(const Data& data) {
             }};
 }
 
+Artefact signedBundle(const Data& data) {
+    const Data codeDirectory = CodeDirectoryBuilder().covers(2, emptyRequirements()).build();
+    const SuperBlobBuilder signature = SuperBlobBuilder::adHoc(codeDirectory);
+    return {.name = "Signed.app",
+            .contents = foundation::toString(data),
+            .algorithm = kSHA256,
+            .hash = codeHashOf(kSHA256, codeDirectory),
+            .stapledWith = [](const Data& ticket) { return foundation::toString(ticket); },
+            .executable = ExecutableImageBuilder().signature(signature.build()).build()};
+}
+
 Artefact writeArtefact(Artefact artefact, const std::string& path) {
-    writeFile(path, artefact.contents);
     artefact.path = path;
+    if (artefact.isBundle()) BundleBuilder().executable(artefact.executable).write(path);
+    writeFile(artefact.file(), artefact.contents);
     return artefact;
 }
 

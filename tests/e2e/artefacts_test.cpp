@@ -154,11 +154,8 @@ TEST_P(FileArtefact, ThatCarriesADamagedTicketIsPutRightByStaplingIt) {
 }
 
 INSTANTIATE_TEST_SUITE_P(OfEveryKind, FileArtefact,
-                         testing::Values(&signedImage, &unsignedImage, &signedPackage), [](const auto& kind) {
-                             const std::string name = kind.param({}).name;  // "Signed.dmg"
-                             return name.substr(0, name.find('.')) +
-                                    (name.ends_with("dmg") ? "Image" : "Package");
-                         });
+                         testing::Values(&signedImage, &unsignedImage, &signedPackage),
+                         [](const auto& kind) { return kind.param({}).kind(); });
 
 // Packages: what else stands behind the archive.
 

@@ -88,11 +88,8 @@ TEST_P(SharedArtefact, ThatAnotherHasLockedIsStapledWhenItIsFree) {
 }
 
 INSTANTIATE_TEST_SUITE_P(OfEveryKind, SharedArtefact,
-                         testing::Values(&signedImage, &unsignedImage, &signedPackage), [](const auto& kind) {
-                             const std::string name = kind.param({}).name;
-                             return name.substr(0, name.find('.')) +
-                                    (name.ends_with("dmg") ? "Image" : "Package");
-                         });
+                         testing::Values(&signedImage, &unsignedImage, &signedPackage),
+                         [](const auto& kind) { return kind.param({}).kind(); });
 
 class SharedBundle : public EndToEndTest {};
 

@@ -27,6 +27,14 @@ bool isSuperuser() {
     return geteuid() == 0;
 }
 
+void giveToOrdinaryUser(const std::string& path) {
+    if (!isSuperuser()) return;
+    must(lchown(path.c_str(), kOrdinaryUser, kOrdinaryUser) == 0, path);
+    if (!S_ISDIR(statusOf(path).st_mode)) return;
+    for (const auto& entry : std::filesystem::recursive_directory_iterator(path))
+        must(lchown(entry.path().c_str(), kOrdinaryUser, kOrdinaryUser) == 0, entry.path());
+}
+
 struct stat statusOf(const std::string& path) {
     struct stat status {};
     must(lstat(path.c_str(), &status) == 0, path);

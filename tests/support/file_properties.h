@@ -13,6 +13,13 @@ namespace pinwell::test {
 
 bool isSuperuser();
 
+/// Whom tests of permissions, which do not hold for the superuser, run as.
+inline constexpr uid_t kOrdinaryUser = 65534;
+
+/// Makes that user the owner of all that is at `path` and below, where the superuser runs the tests; else it
+/// is their own already.
+void giveToOrdinaryUser(const std::string& path);
+
 struct stat statusOf(const std::string& path);
 bool exists(const std::string& path);
 mode_t permissionsOf(const std::string& path);

@@ -19,6 +19,7 @@
 #include "e2e/fixture.h"
 #include "foundation/file_io.h"
 #include "support/disk_image_builder.h"
+#include "support/file_properties.h"
 #include "support/file_size_limit.h"
 #include "support/volume.h"
 
@@ -49,12 +50,50 @@ class OddArtefact : public EndToEndTest {
         expectBoth(item, 66, ElementsAre("Processing: " + item));
     }
 
+    /// By somebody whom permissions hold for, and to whom all in the test's directory belongs.
+    ProcessResult stapleAsOrdinaryUser(const std::string& item) const {
+        Command staple = command({"staple", item});
+        if (!isSuperuser()) return runProcess(staple);
+        // Where the build stands need not be open to everybody.
+        const std::string program = directory / "pinwell";
+        std::filesystem::copy_file(PINWELL_PROGRAM, program, std::filesystem::copy_options::skip_existing);
+        giveToOrdinaryUser(directory.path());
+        const std::string number = std::to_string(kOrdinaryUser);
+        staple.executable = "/usr/bin/setpriv";
+        staple.arguments = {
+            "--reuid=" + number, "--regid=" + number, "--clear-groups", program, "staple", item};
+        return runProcess(staple);
+    }
+
+    /// Moves the item so far down that its path has that length, and answers the path. It is its directories
+    /// that are put one into the other, so that no path on the way is too long.
+    std::string moveDown(const std::string& item, std::size_t length) const {
+        const std::string top = directory / "deep";
+        const std::string outer = directory / "outer";
+        std::string way = item.substr(item.rfind('/'));
+        std::filesystem::create_directory(top);
+        std::filesystem::rename(item, top + way);
+        for (std::size_t rest = length - top.size() - way.size(); rest > 0;) {
+            std::size_t part = std::min<std::size_t>(rest, NAME_MAX + 1);
+            if (rest - part == 1) --part;  // which a slash would fill alone
+            rest -= part;
+            const std::string name = '/' + std::string(part - 1, 'd');
+            std::filesystem::create_directory(outer);
+            std::filesystem::rename(top, outer + name);
+            std::filesystem::rename(outer, top);
+            way.insert(0, name);
+        }
+        EXPECT_EQ(top.size() + way.size(), length);
+        return top + way;
+    }
+
     static void makeNode(const std::string& item, mode_t type, dev_t device = 0) {
         std::filesystem::create_directories(std::filesystem::path(item).parent_path());
         ASSERT_EQ(mknod(item.c_str(), type | 0600U, device), 0) << item;
     }
-    static bool isSuperuser() { return geteuid() == 0; }
 };
+
+constexpr const char* kExecutableInBundle = "/Contents/Programs/Sample";
 
 constexpr std::array kNames{"Odd.dmg", "Odd.pkg", "Odd.app"};
 
@@ -199,19 +238,59 @@ class Immutable {
     bool set_ = false;
 };
 
+// A file or, since a bundle's ticket is one that is removed and made, that one's directory.
+class WriteProtected {
+  public:
+    WriteProtected(const Artefact& artefact, mode_t mode)
+        : file_(artefact.file()), folder_(artefact.isBundle() ? artefact.path + "/Contents" : "") {
+        setMode(file_, mode);
+        if (!folder_.empty()) setMode(folder_, mode | mode >> 2U);
+    }
+    ~WriteProtected() {
+        if (!folder_.empty()) setMode(folder_, 0755);
+        setMode(file_, 0644);
+    }
+    WriteProtected(const WriteProtected&) = delete;
+    WriteProtected& operator=(const WriteProtected&) = delete;
+
+  private:
+    std::string file_;
+    std::string folder_;
+};
+
 class Unwritable : public OddArtefact, public testing::WithParamInterface<Artefact (*)(const Data&)> {
   protected:
     const Artefact made = GetParam()(irregularData(100'000));
+
+    std::string ending() const { return made.name.substr(made.name.find('.')); }
 
     Artefact put(const std::string& place) {
         Artefact artefact = writeArtefact(made, place);
         serveTicket(sealed(artefact.payload()));
         return artefact;
     }
+    /// What of an artefact has the longest path.
+    std::string innermost() const { return made.isBundle() ? kExecutableInBundle : ""; }
+
+    Artefact putAtPathOf(std::size_t length) {
+        Artefact artefact = writeArtefact(made, path(made.name));
+        artefact.path = moveDown(artefact.path, length);
+        return artefact;
+    }
+    testing::Matcher<const ProcessResult&> Refused(const Artefact& artefact) const {
+        return Ended(73, ElementsAre("Processing: " + artefact.path, stapleFailed(73)));
+    }
     void expectRefused(const Artefact& artefact) {
-        EXPECT_THAT(pinwell({"staple", artefact.path}),
-                    Ended(73, ElementsAre("Processing: " + artefact.path, stapleFailed(73))));
-        EXPECT_TRUE(readFile(artefact.path) == artefact.contents);
+        EXPECT_THAT(pinwell({"staple", artefact.path}), Refused(artefact));
+        EXPECT_TRUE(readFile(artefact.file()) == artefact.contents);
+    }
+    void expectProtected(const Artefact& artefact) {
+        for (const mode_t mode : {mode_t{0444}, mode_t{0400}}) {
+            const WriteProtected writeProtected(artefact, mode);
+            EXPECT_THAT(stapleAsOrdinaryUser(artefact.path), Refused(artefact));
+            EXPECT_TRUE(readFile(artefact.file()) == artefact.contents);
+            EXPECT_EQ(permissionsOf(artefact.file()), mode);
+        }
     }
     /// A swap into place that fails is told from what is found there afterwards.
     void expectNotReplaced(const Artefact& artefact) {
@@ -221,7 +300,7 @@ class Unwritable : public OddArtefact, public testing::WithParamInterface<Artefa
             Ended(73, AnyOf(ElementsAre(processing, stapleFailed(73)),
                             ElementsAre(processing, processing, StartsWith("Although we wrote the ticket, "),
                                         stapleFailed(73)))));
-        EXPECT_TRUE(readFile(artefact.path) == artefact.contents);
+        EXPECT_TRUE(readFile(artefact.file()) == artefact.contents);
     }
 };
 
@@ -230,7 +309,7 @@ TEST_P(Unwritable, AnImmutableFileStaysAsItIs) {
         const Volume volume(fileSystem);
         if (volume.missing()) GTEST_SKIP() << *volume.missing();
         const Artefact artefact = put(volume / made.name);
-        const Immutable immutable(artefact.path);
+        const Immutable immutable(artefact.file());
         ASSERT_TRUE(immutable.isSet()) << fileSystem;
         expectNotReplaced(artefact);
     }
@@ -246,6 +325,34 @@ TEST_P(Unwritable, AReadOnlyVolumeStaysAsItIs) {
     }
 }
 
+TEST_P(Unwritable, AWriteProtectedFileStaysAsItIs) {
+    expectProtected(put(path(made.name)));
+}
+
+TEST_P(Unwritable, AWriteProtectedFileStaysAsItIsWhereItCannotBeCloned) {
+    const Volume volume("tmpfs");
+    if (volume.missing()) GTEST_SKIP() << *volume.missing();
+    const Artefact artefact = put(volume / made.name);
+    giveToOrdinaryUser(std::filesystem::path(volume.path()).parent_path());
+    expectProtected(artefact);
+    EXPECT_THAT(namesIn(volume.path()), ElementsAre(made.name));
+}
+
+// A clone could well take its place; but it is protected as well, and whoever did that meant the artefact.
+TEST_P(Unwritable, AWriteProtectedFileStaysAsItIsWhereItCanBeCloned) {
+    const Volume volume("xfs");
+    if (volume.missing()) GTEST_SKIP() << *volume.missing();
+    const Artefact artefact = put(volume / made.name);
+    giveToOrdinaryUser(std::filesystem::path(volume.path()).parent_path());
+    expectProtected(artefact);
+    // A clone that was not written is left behind.
+    std::vector<std::string> names = namesIn(volume.path());
+    EXPECT_EQ(
+        std::erase_if(names, [](const auto& name) { return name.starts_with(".pinwell-replacement-"); }),
+        made.isBundle() ? 0U : 2U);
+    EXPECT_THAT(names, ElementsAre(made.name));
+}
+
 TEST_P(Unwritable, AFullVolumeKeepsTheFileAsItIs) {
     const Volume volume("tmpfs");
     if (volume.missing()) GTEST_SKIP() << *volume.missing();
@@ -253,6 +360,12 @@ TEST_P(Unwritable, AFullVolumeKeepsTheFileAsItIs) {
     // As long as whole pages are: not a byte of it finds room in the last one.
     while (artefact.contents.size() % 4096 != 0 && artefact.name.ends_with("pkg")) artefact.contents += '\0';
     artefact = writeArtefact(artefact, volume / made.name);
+    // What is removed makes room: a bundle that is to find none has no ticket yet.
+    if (artefact.isBundle()) std::filesystem::remove(artefact.file());
+    const auto ticketFile = [&] {
+        return exists(artefact.file()) ? std::optional(readFile(artefact.file())) : std::nullopt;
+    };
+    const auto before = ticketFile();
     serveTicket(sealed(artefact.payload().entry(2, hashOf(1)).entry(2, hashOf(2))));
     std::string filler(1 << 20, 'x');
     const foundation::FileDescriptor file(
@@ -263,8 +376,8 @@ TEST_P(Unwritable, AFullVolumeKeepsTheFileAsItIs) {
     const ProcessResult result = pinwell({"staple", artefact.path});
     // An image may have a page of its own left over that is room enough.
     if (result.exitStatus != 0) {
-        EXPECT_THAT(result, Ended(73, ElementsAre("Processing: " + artefact.path, stapleFailed(73))));
-        EXPECT_TRUE(readFile(artefact.path) == artefact.contents);
+        EXPECT_THAT(result, Refused(artefact));
+        EXPECT_TRUE(ticketFile() == before);
     } else {
         EXPECT_TRUE(artefact.name.ends_with(".dmg"));
     }
@@ -273,15 +386,22 @@ TEST_P(Unwritable, AFullVolumeKeepsTheFileAsItIs) {
 TEST_P(Unwritable, AFileOverTheSizeLimitStaysAsItIsAndNoSignalEndsTheRun) {
     const Artefact artefact = put(path(made.name));
     const ProcessResult result = [&] {
-        const FileSizeLimit limit(artefact.contents.size());
+        const FileSizeLimit limit(artefact.isBundle() ? 100 : artefact.contents.size());
         return pinwell({"staple", artefact.path});
     }();
-    EXPECT_THAT(result, Ended(73, ElementsAre("Processing: " + artefact.path, stapleFailed(73))));
-    EXPECT_TRUE(readFile(artefact.path) == artefact.contents);
+    if (artefact.isBundle()) {
+        // Its ticket is too long as a temporary file already.
+        EXPECT_THAT(result,
+                    Ended(73, ElementsAre("Processing: " + artefact.path,
+                                          StartsWith("Could not write ticket to "), stapleFailed(73))));
+    } else {
+        EXPECT_THAT(result, Refused(artefact));
+    }
+    EXPECT_TRUE(readFile(artefact.file()) == artefact.contents);
 }
 
 TEST_P(Unwritable, OrNotAFileMayHaveAnyName) {
-    const std::string ending = made.name.substr(made.name.find('.'));
+    const std::string ending = this->ending();
     for (const std::string& name :
          {"\xFF\xFE\xC0" + ending, std::string(NAME_MAX - ending.size(), 'n') + ending,
           "new\nline\x1B[2J" + ending, "-v" + ending, " " + ending}) {
@@ -292,25 +412,48 @@ TEST_P(Unwritable, OrNotAFileMayHaveAnyName) {
         EXPECT_EQ(result.exitStatus, 0) << testing::PrintToString(name) << result.output;
         EXPECT_EQ(result.outputLines().size(), 3U);
         EXPECT_EQ(result.output.find('\x1B'), std::string::npos);
-        EXPECT_TRUE(readFile(artefact.path) == artefact.stapledWith(ticket));
-        std::filesystem::remove(artefact.path);
+        EXPECT_TRUE(readFile(artefact.file()) == artefact.stapledWith(ticket));
+        std::filesystem::remove_all(artefact.path);
     }
 }
 
+TEST_P(Unwritable, OrNotAFileMayLieAsDeepAsPathsReach) {
+    const Artefact artefact = putAtPathOf(PATH_MAX - 1 - innermost().size());
+    const Data ticket = sealed(artefact.payload());
+    serveTicket(ticket);
+    EXPECT_EQ(pinwell({"staple", artefact.path}).exitStatus, 0);
+    EXPECT_TRUE(readFile(artefact.file()) == artefact.stapledWith(ticket));
+}
+
 TEST_P(Unwritable, APathOverTheLimitDoesNotExist) {
-    const std::string place = path(made.name);
-    std::string longer = directory / "builds/";
-    while (longer.size() <= PATH_MAX) longer += "./";
-    expectBoth(longer + made.name, 66, ElementsAre(StartsWith("File ")));
-    expectBoth(place + std::string(NAME_MAX, 'n'), 66, ElementsAre(StartsWith("File ")));
+    const std::string place = putAtPathOf(PATH_MAX).path;
+    expectBoth(place, 66, ElementsAre(StartsWith("File " + place + " does not exist. ")));
+    const std::string name = path(std::string(NAME_MAX, 'n') + ending());
+    expectBoth(name, 66, ElementsAre(StartsWith("File " + name + " does not exist. ")));
 }
 
 INSTANTIATE_TEST_SUITE_P(OfEveryKind, Unwritable,
-                         testing::Values(&signedImage, &unsignedImage, &signedPackage), [](const auto& kind) {
-                             const std::string name = kind.param({}).name;
-                             return name.substr(0, name.find('.')) +
-                                    (name.ends_with("dmg") ? "Image" : "Package");
-                         });
+                         testing::Values(&signedImage, &unsignedImage, &signedPackage, &signedBundle),
+                         [](const auto& kind) { return kind.param({}).kind(); });
+
+// As everywhere, who may change a directory may remove what is in it.
+// Its path is not too long, what is in it is out of reach.
+TEST_F(OddArtefact, ABundleWhoseExecutableLiesPastTheLimitOfPathsHasNoHash) {
+    const std::string deep = moveDown(bundle, PATH_MAX - std::string_view(kExecutableInBundle).size());
+    expectUnreadable(deep);
+}
+
+TEST_F(OddTicketPlace, ThatIsWriteProtectedInABundleThatIsNotIsReplaced) {
+    const Data served = ticket();
+    serveTicket(served);
+    stapleByHand(ticketForOthers());
+    for (const mode_t mode : {mode_t{0444}, mode_t{0400}}) {
+        setMode(ticketPath(), mode);
+        EXPECT_EQ(stapleAsOrdinaryUser(bundle).exitStatus, 0);
+        EXPECT_EQ(stapled(), served);
+        EXPECT_EQ(permissionsOf(ticketPath()) & mode_t{S_IWUSR}, mode_t{S_IWUSR});
+    }
+}
 
 TEST_F(OddArtefact, AFileThatGrowsWhileItIsStapledIsRefused) {
     const Artefact image = writeArtefact(unsignedImage(), path("Image.dmg"));

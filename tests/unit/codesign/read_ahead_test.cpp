@@ -149,7 +149,7 @@ TEST(ReadAhead, OfAFileThatBecameShorterFails) {
 TEST(ReadAhead, WhereNoThreadIsToBeHadReadsOnTheCallers) {
     const auto check = [] {
         // The limit does not hold for the superuser.
-        if (isSuperuser() && setresuid(65534, 65534, 65534) != 0) _exit(2);
+        if (isSuperuser() && setresuid(kOrdinaryUser, kOrdinaryUser, kOrdinaryUser) != 0) _exit(2);
         constexpr rlimit kNoMore{0, 0};
         if (setrlimit(RLIMIT_NPROC, &kNoMore) != 0) _exit(3);
         const NumberedPieces source(10);

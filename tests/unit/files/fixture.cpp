@@ -11,8 +11,6 @@
 namespace pinwell::test {
 namespace {
 
-constexpr uid_t kOrdinaryUser = 65534;
-
 void must(bool done, const std::string& what) {
     if (!done) throw std::system_error(errno, std::generic_category(), what);
 }
