@@ -139,18 +139,20 @@ TEST_P(Volumes, KeepWhatAnArtefactIsBesidesItsContents) {
 TEST_P(Volumes, DateAnArtefactFromItsStapling) {
     constexpr timespec kLongAgo{1'000'000'000, 0};
     const std::array<timespec, 2> times{kLongAgo, kLongAgo};
-    ASSERT_EQ(utimensat(AT_FDCWD, artefact.path.c_str(), times.data(), 0), 0);
+    ASSERT_EQ(utimensat(AT_FDCWD, artefact.file().c_str(), times.data(), 0), 0);
     writeFile(volume / "earlier", "x");
 
     ASSERT_THAT(stapleArtefact(), Worked());
-    const timespec stapledAt = statusOf(artefact.path).st_mtim;
+    const timespec stapledAt = statusOf(artefact.file()).st_mtim;
     EXPECT_FALSE(isEarlier(stapledAt, statusOf(volume / "earlier").st_mtim));
     writeFile(volume / "later", "x");
     EXPECT_FALSE(isEarlier(statusOf(volume / "later").st_mtim, stapledAt));
 }
 
 TEST_P(Volumes, HoldNothingButTheArtefactAfterwards) {
+    const auto before = namesBelow(volume.path());
     ASSERT_THAT(stapleArtefact(), Worked());
+    EXPECT_EQ(namesBelow(volume.path()), before);
     EXPECT_THAT(names(), ElementsAre(artefact.name));
     EXPECT_THAT(namesBelow(directory / "home"), IsEmpty());
 }
@@ -158,16 +160,16 @@ TEST_P(Volumes, HoldNothingButTheArtefactAfterwards) {
 TEST_P(Volumes, TakeAnotherTicketInPlaceOfTheFirst) {
     ticket = sealed(artefact.payload().entry(2, hashOf(0x11)).entry(2, hashOf(0x22)));
     ASSERT_THAT(stapleArtefact(), Worked());
-    EXPECT_EQ(readFile(artefact.path), artefact.stapledWith(ticket));
+    EXPECT_EQ(readFile(artefact.file()), artefact.stapledWith(ticket));
     ticket = sealed(artefact.payload());
     ASSERT_THAT(stapleArtefact(), Worked());
-    EXPECT_EQ(readFile(artefact.path), artefact.stapledWith(ticket));
+    EXPECT_EQ(readFile(artefact.file()), artefact.stapledWith(ticket));
     EXPECT_THAT(names(), ElementsAre(artefact.name));
     EXPECT_THAT(validateArtefact(), Ended(0, Contains(kValidated)));
 }
 
 TEST_P(Volumes, AreNotWrittenToByAValidation) {
-    writeFile(artefact.path, artefact.stapledWith(ticket));
+    writeFile(artefact.file(), artefact.stapledWith(ticket));
     serveTicket(ticket);
     ASSERT_EQ(mount(nullptr, volume.path().c_str(), nullptr, MS_REMOUNT | MS_RDONLY, nullptr), 0);
     EXPECT_THAT(validateArtefact(), Ended(0, Contains(kValidated)));
@@ -177,13 +179,13 @@ TEST_P(Volumes, AreNotWrittenToByAValidation) {
 TEST_P(Volumes, ThatAreReadOnlyKeepTheArtefactAsItIs) {
     ASSERT_EQ(mount(nullptr, volume.path().c_str(), nullptr, MS_REMOUNT | MS_RDONLY, nullptr), 0);
     EXPECT_THAT(stapleArtefact(), FailedToWrite());
-    EXPECT_EQ(readFile(artefact.path), artefact.contents);
+    EXPECT_EQ(readFile(artefact.file()), artefact.contents);
     EXPECT_THAT(names(), ElementsAre(artefact.name));
 }
 
 INSTANTIATE_TEST_SUITE_P(OfEveryKind, Volumes,
                          Combine(Values("xfs", "btrfs", "xfs -m reflink=0", "ext4", "tmpfs"),
-                                 Values(&signedImage, &unsignedImage, &signedPackage)),
+                                 Values(&signedImage, &unsignedImage, &signedPackage, &signedBundle)),
                          Volumes::nameOf);
 
 using CloningVolumes = Volumes;
@@ -291,6 +293,19 @@ INSTANTIATE_TEST_SUITE_P(OfEveryKind, FullPlainVolume,
                          Combine(Values("ext4", "tmpfs"),
                                  Values(&signedImage, &unsignedImage, &signedPackage)),
                          Volumes::nameOf);
+
+using FullVolumeWithABundle = FullVolume;
+
+// The old one goes before the new one comes, and makes less room than that needs.
+TEST_P(FullVolumeWithABundle, HasNoTicketRatherThanHalfOfOne) {
+    EXPECT_THAT(stapleArtefact(), FailedToWrite());
+    EXPECT_FALSE(exists(artefact.file()));
+    EXPECT_EQ(foundation::toData(readFile(artefact.path + "/Contents/Programs/Sample")), artefact.executable);
+    EXPECT_THAT(names(), ElementsAre(artefact.name, "filling"));
+}
+
+INSTANTIATE_TEST_SUITE_P(OnVolumes, FullVolumeWithABundle,
+                         Combine(Values("xfs", "ext4", "tmpfs"), Values(&signedBundle)), Volumes::nameOf);
 
 }  // namespace
 }  // namespace pinwell::test
