@@ -36,6 +36,13 @@ bool contains(const CertificateList& list, const X509Certificate& certificate) {
                        [&](const X509CertificateRef& entry) { return entry->der() == certificate.der(); });
 }
 
+bool isDistrusted(const X509Certificate& certificate, const CertificateList& denied) {
+    return std::any_of(denied.begin(), denied.end(), [&](const X509CertificateRef& entry) {
+        // A key that cannot be read is like no other; such a certificate is known by what it says.
+        return entry->saysTheSameAs(certificate) || entry->hasSameSubjectAndKeyAs(certificate);
+    });
+}
+
 std::optional<CertificateList> readPem(ByteView text) {
     if (text.size() > kMaximumPemFileSize) return std::nullopt;
     const ErrorQueueGuard guard;

@@ -18,6 +18,13 @@ using CertificateList = std::vector<X509CertificateRef>;
 /// Whether one of the list is this certificate, byte for byte.
 bool contains(const CertificateList& list, const X509Certificate& certificate);
 
+/// Whether distrust of those on the list reaches this certificate: it says the same as one of them, or has
+/// the same subject and key. Not a comparison of bytes, since a signature can be written in more than one
+/// way: from (r, s) of ECDSA anyone makes (r, n - s), which verifies as well. And what a person distrusts is
+/// who holds the key, so a renewal, or a certificate that another authority gave for it, does not bring it
+/// back.
+bool isDistrusted(const X509Certificate& certificate, const CertificateList& denied);
+
 struct Anchors {
     CertificateList roots;          // the platform maker's own
     CertificateList compatibility;  // further ones of the compatibility TLS policy

@@ -82,6 +82,13 @@ std::shared_ptr<const X509PublicKey> readPublicKey(const X509* certificate) {
     return std::make_shared<const X509PublicKey>(std::shared_ptr<EVP_PKEY>(key, EVP_PKEY_free));
 }
 
+/// The part of a well-formed certificate that its signature covers.
+ByteView signedPart(ByteView certificate) {
+    const std::optional<der::Element> whole = der::readElement(certificate);
+    const std::optional<der::Element> part = whole ? der::readElement(whole->contents) : std::nullopt;
+    return part ? part->whole : ByteView();
+}
+
 /// There are three versions, and extensions in the last of them alone (RFC 5280, 4.1.2.1 and 4.1.2.9).
 bool isWhatItsVersionSays(const X509* certificate) {
     const long version = X509_get_version(certificate);
@@ -139,6 +146,10 @@ bool X509Certificate::isNamedAsIssuerOf(const X509Certificate& other) const {
 bool X509Certificate::verifiesSignatureOf(const X509Certificate& other) const {
     const ErrorQueueGuard guard;
     return publicKey_ != nullptr && X509_verify(other.certificate_.get(), publicKey_->native()) == 1;
+}
+
+bool X509Certificate::saysTheSameAs(const X509Certificate& other) const {
+    return std::ranges::equal(signedPart(der_), signedPart(other.der_));
 }
 
 bool X509Certificate::hasSameSubjectAndKeyAs(const X509Certificate& other) const {

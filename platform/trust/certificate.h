@@ -59,6 +59,10 @@ class X509Certificate final : public Certificate {
     /// Whether this certificate's key verifies the other's signature.
     bool verifiesSignatureOf(const X509Certificate& other) const;
 
+    /// Whether both say the same, byte for byte (tbsCertificate, RFC 5280, 4.1.1.1), whatever their
+    /// signatures are.
+    bool saysTheSameAs(const X509Certificate& other) const;
+
     /// Whether both are about the same subject and the same key, however they differ otherwise.
     bool hasSameSubjectAndKeyAs(const X509Certificate& other) const;
 

@@ -95,7 +95,7 @@ CandidateChain ChainBuilder::describe(const CertificateList& chain) {
     for (std::size_t i = 0; i < chain.size(); ++i) {
         if (!result.badSignature && i + 1 < chain.size() && !verifies(chain[i + 1], chain[i]))
             result.badSignature = i;
-        if (!result.denied && contains(anchors_.denied, *chain[i])) result.denied = i;
+        if (!result.denied && isDistrusted(*chain[i], anchors_.denied)) result.denied = i;
         if (contains(anchors_.allowed, *chain[i])) result.anchoring = Anchoring::user;
     }
     if (contains(platformAnchors_, *chain.back())) result.anchoring = Anchoring::platform;

@@ -29,7 +29,7 @@ enum class Anchoring {
 struct CandidateChain {
     CertificateList certificates;             // leaf first
     std::optional<std::size_t> badSignature;  // the first whose signature the next one's key does not verify
-    std::optional<std::size_t> denied;        // the first that the user distrusts
+    std::optional<std::size_t> denied;        // the first that the user's distrust reaches
     Anchoring anchoring = Anchoring::none;
 };
 

@@ -151,6 +151,28 @@ void issueInACircle(Scene& scene, const ChainFields& fields) {
     scene.list = {issueCertificate(fields.leaf, &second).der, second.der, issueCertificate(one, &second).der};
 }
 
+const IssuedCertificate& at(const IssuedChain& chain, Position position) {
+    const std::array all{&chain.leaf, &chain.intermediate, &chain.root};
+    return *all.at(position);
+}
+
+/// Of the chain's certificate: the same under the other signature that verifies.
+Data twin(const Scene& scene, Position position) {
+    const Position issuer = position == kLeaf ? kIntermediate : kRoot;
+    return underOtherSignature(at(scene.chain, position).der, at(scene.chain, issuer).key);
+}
+
+/// The chain's certificate as its issuer would renew it: another serial number, other dates, the same key.
+Data renewed(const Scene& scene, const ChainFields& fields, Position position) {
+    CertificateFields later = position == kLeaf           ? fields.leaf
+                              : position == kIntermediate ? fields.intermediate
+                                                          : fields.root;
+    later.serial += 100;
+    later.notBefore.seconds += kDay;
+    if (position == kRoot) return issueCertificate(later, nullptr).der;
+    return issueCertificate(later, &at(scene.chain, position == kLeaf ? kIntermediate : kRoot)).der;
+}
+
 void names(ChainFields& chain, const char* words) {
     chain.leaf.subjectAlternativeNames = words;
 }
@@ -307,6 +329,19 @@ const std::vector<ChainFault>& chainFaults() {
         {"RootDeniedAndLeftOut", "the user distrusts the root, which is left out of the list", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.denied = {s.chain.root.der}; s.list.pop_back(); }},
         {"AllowedAndDenied", "the user trusts and distrusts the leaf", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.allowed = s.denied = {s.chain.leaf.der}; }},
         {"DeniedAndCorrupt", "the user distrusts the root, and a signature is corrupt besides", "3 3 3", [](Chain& c) { c.leaf.corruptSignature = true; }, [](Scene& s, const Chain&) { s.denied = {s.chain.root.der}; }},
+        // User trust goes by what a certificate says, and not by the bytes of its signature.
+        {"LeafDeniedAndReencoded", "the user distrusts the leaf, which comes as (r, n - s)", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.denied = {s.chain.leaf.der}; s.list[kLeaf] = twin(s, kLeaf); }},
+        {"IntermediateDeniedAndReencoded", "the user distrusts the intermediate, which comes as (r, n - s)", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.denied = {s.chain.intermediate.der}; s.list[kIntermediate] = twin(s, kIntermediate); }},
+        {"RootDeniedAndReencoded", "the user distrusts the root, which comes as (r, n - s)", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.denied = {s.chain.root.der}; s.list[kRoot] = twin(s, kRoot); }},
+        {"TwinOfTheLeafDenied", "the user distrusts the leaf as (r, n - s)", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.denied = {twin(s, kLeaf)}; }},
+        {"TwinOfTheIntermediateDenied", "the user distrusts the intermediate as (r, n - s)", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.denied = {twin(s, kIntermediate)}; }},
+        {"TwinOfTheRootDenied", "the user distrusts the root as (r, n - s)", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.denied = {twin(s, kRoot)}; }},
+        {"TwinOfTheAllowedDenied", "the user trusts the leaf and distrusts it as (r, n - s)", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.allowed = {s.chain.leaf.der}; s.denied = {twin(s, kLeaf)}; }},
+        {"LeafDeniedAndCorrupt", "the user distrusts the leaf, which comes with a corrupt signature", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.denied = {s.chain.leaf.der}; s.list[kLeaf].back() ^= std::byte{1}; }},
+        {"IntermediateDeniedUnderAnotherAlgorithm", "the user distrusts the intermediate, whose algorithm outside is another", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.denied = {s.chain.intermediate.der}; flipBehind(s.list[kIntermediate], kEcdsaWithSha2, 0, true, std::byte{1}); }},
+        {"LeafDeniedAndRenewed", "the user distrusts the leaf, which was issued again with its key", "3 3 3", nullptr, [](Scene& s, const Chain& f) { s.denied = {s.chain.leaf.der}; s.list[kLeaf] = renewed(s, f, kLeaf); }},
+        {"IntermediateDeniedAndRenewed", "the user distrusts the intermediate, which was issued again with its key", "3 3 3", nullptr, [](Scene& s, const Chain& f) { s.denied = {s.chain.intermediate.der}; s.list[kIntermediate] = renewed(s, f, kIntermediate); }},
+        {"RenewedRootDenied", "the user distrusts the root as it was issued again with its key", "3 3 3", nullptr, [](Scene& s, const Chain& f) { s.denied = {renewed(s, f, kRoot)}; }},
         // The clock.
         {"ClockBeforeEveryDate", "the clock stands in 1990; the ticket policy has no option on dates", "4 5 5", nullptr, [](Scene& s, const Chain&) { s.now = {631152000}; }},
         {"ClockBehindEveryDate", "the clock stands in 2060; the ticket policy has no option on dates", "4 5 5", nullptr, [](Scene& s, const Chain&) { s.now = {2840140800}; }},
@@ -352,6 +387,10 @@ const std::vector<ChainFault>& chainFaults() {
         {"LeafTwiceBesidesTheIntermediate", "nothing: what is of no use is passed over", "4 4 4", nullptr, [](Scene& s, const Chain&) { s.list = {s.list[0], s.list[0], s.list[1]}; }},
         {"UnrelatedBehind", "nothing: what is of no use is passed over", "4 4 4", nullptr, [](Scene& s, const Chain& f) { s.list[2] = impostorOf(f).leaf.der; }},
         {"AllowedBesides", "nothing: the platform's anchor comes before the user's", "4 4 4", nullptr, [](Scene& s, const Chain&) { s.allowed = s.roots; }},
+        {"Twins", "nothing: leaf and intermediate come as (r, n - s), which verifies", "4 4 4", nullptr, [](Scene& s, const Chain&) { s.list[kLeaf] = twin(s, kLeaf); s.list[kIntermediate] = twin(s, kIntermediate); }},
+        {"Renewed", "nothing: leaf and intermediate were issued again", "4 4 4", nullptr, [](Scene& s, const Chain& f) { s.list[kLeaf] = renewed(s, f, kLeaf); s.list[kIntermediate] = renewed(s, f, kIntermediate); }},
+        {"NamesakesDenied", "nothing: the user distrusts certificates of these names with other keys", "4 4 4", nullptr, [](Scene& s, const Chain& f) { s.denied = impostorOf(f).list(); }},
+        {"KeysDeniedUnderOtherNames", "nothing: the user distrusts certificates of these keys with other names", "4 4 4", nullptr, [](Scene& s, const Chain& f) { Chain other = f; for (C* one : {&other.root, &other.intermediate, &other.leaf}) one->subject = commonName("Other " + one->subject.back().second); s.denied = other.issue().list(); }},
         {"HostInCapitals", "nothing: names differ in case alone", "- 4 4", [](Chain& c) { names(c, "DNS:API.Lumora.Example"); }},
         {"Wildcard", "nothing: a wildcard for the first label", "- 4 4", [](Chain& c) { names(c, "DNS:*.lumora.example"); }},
         {"HostWithItsDot", "nothing: the host is asked for with the root's dot", "- 4 4", nullptr, nullptr, "api.lumora.example."},

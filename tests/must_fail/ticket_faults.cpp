@@ -222,6 +222,8 @@ const std::vector<TicketFault>& ticketFaults() {
         {"UsersAnchorOnly", "the user alone trusts the root", kRefused, goodTicket, [](SignerAnchors& a) { a.roots.swap(a.allowed); }},
         {"ImpostorAnchor", "the anchor is an impostor's root", kRefused, goodTicket, [](SignerAnchors& a) { a.roots = {impostor().root.der}; }},
         {"AnchorDenied", "the user distrusts the root", kRefused, goodTicket, [](SignerAnchors& a) { a.denied = a.roots; }},
+        {"SignerDeniedUnderAnotherSignature", "the user distrusts the signer, and holds its certificate under another signature", kRefused, goodTicket, [](SignerAnchors& a) { a.denied = {TicketChain().issue().leaf.der}; }},
+        {"IntermediateDeniedUnderAnotherSignature", "the user distrusts the intermediate, and holds it under another signature", kRefused, goodTicket, [](SignerAnchors& a) { a.denied = {TicketChain().issue().intermediate.der}; }},
     };
     return faults;
 }

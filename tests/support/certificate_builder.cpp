@@ -2,6 +2,8 @@
 
 #include <arpa/inet.h>
 #include <openssl/bio.h>
+#include <openssl/bn.h>
+#include <openssl/core_names.h>
 #include <openssl/ec.h>
 #include <openssl/evp.h>
 #include <openssl/pem.h>
@@ -16,6 +18,8 @@
 
 #include "foundation/byte_writer.h"
 #include "foundation/handle.h"
+#include "support/ticket_builder.h"
+#include "trust/der.h"
 
 namespace pinwell::test {
 namespace {
@@ -28,6 +32,8 @@ using foundation::Handle;
 
 using BioHandle = Handle<BIO, BIO_free_all>;
 using CertificateHandle = Handle<X509, X509_free>;
+using EcdsaHandle = Handle<ECDSA_SIG, ECDSA_SIG_free>;
+using NumberHandle = Handle<BIGNUM, BN_free>;
 using DigestHandle = Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
 using ExtensionHandle = Handle<X509_EXTENSION, X509_EXTENSION_free>;
 using NameHandle = Handle<X509_NAME, X509_NAME_free>;
@@ -259,6 +265,43 @@ IssuedCertificate issueCertificate(const CertificateFields& fields, const Issued
     IssuedCertificate issued{encoded(certificate.get(), i2d_X509), fields.key, fields.subject, subjectId};
     if (fields.corruptSignature) issued.der.back() ^= std::byte{1};
     return issued;
+}
+
+namespace {
+
+/// (r, n - s) for (r, s), both in DER.
+Data otherSignature(ByteView signature, const SigningKey& signer) {
+    const unsigned char* at = unsignedBytes(signature.data());
+    const EcdsaHandle given(d2i_ECDSA_SIG(nullptr, &at, static_cast<long>(signature.size())));
+    require(given != nullptr, "no elliptic-curve signature");
+    BIGNUM* order = nullptr;
+    require(EVP_PKEY_get_bn_param(signer.native(), OSSL_PKEY_PARAM_EC_ORDER, &order) == 1, "no order");
+    const NumberHandle owned(order);
+    NumberHandle r(BN_dup(ECDSA_SIG_get0_r(given.get())));
+    NumberHandle s(BN_new());
+    const EcdsaHandle other(ECDSA_SIG_new());
+    require(r && s && other && BN_sub(s.get(), order, ECDSA_SIG_get0_s(given.get())) == 1, "n - s");
+    require(ECDSA_SIG_set0(other.get(), r.release(), s.release()) == 1, "signature");
+    return encoded(other.get(), i2d_ECDSA_SIG);
+}
+
+}  // namespace
+
+Data underOtherSignature(ByteView certificate, const SigningKey& issuer) {
+    const auto whole = trust::der::readElement(certificate);
+    require(whole.has_value(), "no certificate");
+    const auto body = trust::der::readElement(whole->contents);
+    require(body.has_value(), "no body");
+    const auto algorithm = trust::der::readElement(whole->contents.subspan(body->whole.size()));
+    require(algorithm.has_value(), "no algorithm");
+    const std::size_t signedSize = body->whole.size() + algorithm->whole.size();
+    const auto bits = trust::der::readElement(whole->contents.subspan(signedSize));
+    require(bits.has_value() && !bits->contents.empty(), "no signature");
+    const Data other = otherSignature(bits->contents.subspan(1), issuer);  // behind the count of unused bits
+    return derElement(0x30, ByteWriter()
+                                .bytes(whole->contents.first(signedSize))
+                                .bytes(derElement(0x03, ByteWriter().u8(0).bytes(other).data()))
+                                .data());
 }
 
 std::vector<Data> IssuedChain::list(bool withRoot) const {

@@ -125,6 +125,10 @@ struct IssuedCertificate {
 /// Null `issuer`: signed with its own key, under its own name.
 IssuedCertificate issueCertificate(const CertificateFields& fields, const IssuedCertificate* issuer);
 
+/// The certificate under the signature that anyone can make of its own: where (r, s) verifies, (r, n - s)
+/// does too (n is the order of the curve). Its issuer's key, an elliptic-curve one, says the curve.
+foundation::Data underOtherSignature(foundation::ByteView certificate, const SigningKey& issuer);
+
 /// A PEM block of that label around the bytes.
 std::string toPem(std::string_view label, foundation::ByteView der);
 
