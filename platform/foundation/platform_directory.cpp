@@ -123,7 +123,7 @@ std::vector<std::string> PlatformDirectory::pemFiles(std::string_view directory)
     std::filesystem::directory_iterator entry(path_ + "/" + std::string(directory), failure);
     for (; !failure && entry != std::filesystem::directory_iterator(); entry.increment(failure)) {
         const std::string& file = entry->path().native();
-        if (file.ends_with(".pem") && isRegularFile(file)) files.push_back(file);
+        if (file.ends_with(".pem")) files.push_back(file);
     }
     std::sort(files.begin(), files.end());
     return files;

@@ -29,7 +29,8 @@ class PlatformDirectory {
     /// syntax error, the key for an entry that is not what it should be.
     Result<std::string> lumoraHost() const;
 
-    /// Regular files named *.pem (links followed) in one of the certificate directories, in byte order.
+    /// All that is named *.pem in one of the certificate directories, in byte order: files, and also what
+    /// cannot be read as one, so that it can be named.
     std::vector<std::string> rootCertificateFiles() const { return pemFiles("roots"); }
     std::vector<std::string> compatibilityRootCertificateFiles() const { return pemFiles("compat-roots"); }
     std::vector<std::string> userAllowedCertificateFiles() const { return pemFiles("user-trust/allow"); }

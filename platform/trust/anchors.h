@@ -36,7 +36,8 @@ struct Anchors {
 /// that cannot be read.
 std::optional<CertificateList> readPem(ByteView text);
 
-/// What stands in the directory now. A file that cannot be read counts for nothing and is named in one line.
+/// What stands in the directory now. What is named *.pem there and cannot be read, a link that
+/// leads nowhere or a directory as well as a malformed file, counts for nothing and is named in one line.
 Anchors loadAnchors(const foundation::PlatformDirectory& directory,
                     const std::function<void(std::string_view)>& logError);
 

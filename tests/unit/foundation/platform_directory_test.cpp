@@ -117,7 +117,7 @@ TEST(PlatformDirectory, ListsCertificateFilesInByteOrder) {
     EXPECT_THAT(platform.userDeniedCertificateFiles(), ElementsAre(directory / "user-trust/deny/e.pem"));
 }
 
-TEST(PlatformDirectory, ListsOnlyRegularFilesAndFollowsLinks) {
+TEST(PlatformDirectory, ListsEveryEntryOfThatNameWhateverItIs) {
     const TemporaryDirectory directory;
     test::writeFile(directory / "elsewhere", "x");
     std::filesystem::create_directories(directory / "roots/directory.pem");
@@ -125,7 +125,8 @@ TEST(PlatformDirectory, ListsOnlyRegularFilesAndFollowsLinks) {
     std::filesystem::create_symlink("missing", directory / "roots/dangling.pem");
     ASSERT_EQ(mkfifo((directory / "roots/pipe.pem").c_str(), 0600), 0);
     EXPECT_THAT(PlatformDirectory(directory.path()).rootCertificateFiles(),
-                ElementsAre(directory / "roots/link.pem"));
+                ElementsAre(directory / "roots/dangling.pem", directory / "roots/directory.pem",
+                            directory / "roots/link.pem", directory / "roots/pipe.pem"));
 }
 
 TEST(PlatformDirectory, ThatDoesNotExistIsEmpty) {

@@ -1,8 +1,11 @@
 #include "trust/anchors.h"
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include "support/certificate_builder.h"
+#include "support/file_properties.h"
+#include "support/temporary_directory.h"
 
 namespace pinwell::trust {
 namespace {
@@ -42,6 +45,79 @@ TEST(AnchorFile, CountsForNothingWhenOneBlockIsBroken) {
 
 TEST(AnchorFile, HasALimitOnItsSize) {
     EXPECT_FALSE(readPem(asBytes(chain().root.pem() + std::string(kMaximumPemFileSize, '\n'))));
+}
+
+constexpr const char* kStores[] = {"roots", "compat-roots", "user-trust/allow", "user-trust/deny"};
+
+struct Loaded {
+    Anchors anchors;
+    std::vector<std::string> log;
+
+    std::vector<std::size_t> counts() const {
+        return {anchors.roots.size(), anchors.compatibility.size(), anchors.allowed.size(),
+                anchors.denied.size()};
+    }
+};
+
+Loaded loadFrom(const test::TemporaryDirectory& directory) {
+    Loaded loaded;
+    loaded.anchors = loadAnchors(foundation::PlatformDirectory(directory.path()),
+                                 [&](std::string_view line) { loaded.log.emplace_back(line); });
+    return loaded;
+}
+
+struct Unreadable {
+    const char* name;
+    std::function<void(const std::string& path)> make;
+    const char* reason;
+
+    friend void PrintTo(const Unreadable& entry, std::ostream* out) { *out << entry.name; }
+};
+
+class UnreadableAnchor : public testing::TestWithParam<Unreadable> {};
+
+TEST_P(UnreadableAnchor, CountsForNothingAndIsNamedInTheLog) {
+    const test::TemporaryDirectory directory;
+    std::vector<testing::Matcher<std::string>> lines;
+    for (const char* store : kStores) {
+        test::writeFile(directory / (std::string(store) + "/good.pem"), chain().root.pem());
+        const std::string path = directory / (std::string(store) + "/bad.pem");
+        GetParam().make(path);
+        lines.emplace_back(testing::AllOf(testing::StartsWith("Could not read certificates. " + path),
+                                          testing::HasSubstr(GetParam().reason)));
+    }
+    const Loaded loaded = loadFrom(directory);
+    EXPECT_THAT(loaded.log, testing::ElementsAreArray(lines));
+    EXPECT_THAT(loaded.counts(), testing::Each(1));
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Entry, UnreadableAnchor,
+    testing::Values(
+        Unreadable{"DanglingLink", [](const std::string& path) { test::makeLink("missing", path); },
+                   "No such file"},
+        Unreadable{"LinkToItself", [](const std::string& path) { test::makeLink("bad.pem", path); },
+                   "symbolic links"},
+        Unreadable{"Directory", [](const std::string& path) { test::makeDirectory(path); }, "directory"},
+        Unreadable{"Pipe", [](const std::string& path) { test::makeFifo(path); }, "Invalid argument"},
+        Unreadable{"Device", [](const std::string& path) { test::makeLink("/dev/zero", path); },
+                   "Invalid argument"},
+        Unreadable{"EmptyFile", [](const std::string& path) { test::writeFile(path, ""); }, "not a PEM file"},
+        Unreadable{"Text", [](const std::string& path) { test::writeFile(path, "text"); }, "not a PEM file"},
+        Unreadable{"Giant",
+                   [](const std::string& path) {
+                       test::writeFile(path, chain().root.pem() + std::string(kMaximumPemFileSize, ' '));
+                   },
+                   "File too large"}),
+    [](const auto& tested) { return std::string(tested.param.name); });
+
+TEST(AnchorStore, PassesOverOtherNames) {
+    const test::TemporaryDirectory directory;
+    for (const char* name : {"README", "a.crt", "a.pem.old"})
+        test::writeFile(directory / (std::string("user-trust/deny/") + name), "text");
+    const Loaded loaded = loadFrom(directory);
+    EXPECT_THAT(loaded.log, testing::IsEmpty());
+    EXPECT_THAT(loaded.counts(), testing::Each(0));
 }
 
 TEST(AnchorList, ContainsACertificateByteForByte) {
