@@ -1,8 +1,29 @@
 #include "trust/chain_builder.h"
 
 #include <gtest/gtest.h>
+#include <openssl/x509.h>
+
+#include <atomic>
 
 #include "scene.h"
+
+namespace {
+
+std::atomic<std::size_t> signatureChecks = 0;
+
+}  // namespace
+
+// The linker sends every call of X509_verify here (ld's --wrap).
+extern "C" {
+// NOLINTBEGIN: reserved names that are not ours to choose
+int __real_X509_verify(X509* certificate, EVP_PKEY* key);
+int __wrap_X509_verify(X509* certificate, EVP_PKEY* key);
+int __wrap_X509_verify(X509* certificate, EVP_PKEY* key) {
+    ++signatureChecks;
+    return __real_X509_verify(certificate, key);
+}
+// NOLINTEND
+}
 
 namespace pinwell::trust {
 namespace {
@@ -91,6 +112,35 @@ TEST(ChainBuilder, EndsInAThicketOfSelfIssuedCertificates) {
         }
     }
     EXPECT_EQ(scene.verdict(anchorOnly()), Verdict::recoverableFailure);
+}
+
+TEST(ChainBuilder, MakesNoMoreSignatureChecksThanItsLimit) {
+    // One name for all and no key identifiers: each certificate could have issued each, by all that can be
+    // seen without checking a signature. The next in the list is the one that did.
+    std::vector<IssuedCertificate> keys;
+    CertificateFields fields = authority("Same", "same0");
+    fields.subjectKeyIdentifier = fields.authorityKeyIdentifier = test::KeyIdentifier::omitted();
+    for (std::size_t i = 0; i < kMaximumCertificates; ++i) {
+        fields.key = SigningKey::cached(KeyKind::p256, "same" + std::to_string(i));
+        keys.push_back(issueCertificate(fields, nullptr));
+    }
+    CertificateList list;
+    for (std::size_t i = 0; i < keys.size(); ++i) {
+        fields.key = keys[i].key;
+        list.push_back(X509Certificate::parse(issueCertificate(fields, &keys[(i + 1) % keys.size()]).der));
+    }
+    const CertificateList noAnchors;
+    const Anchors nothing;
+    ChainBuilder builder(list, noAnchors, nothing);
+    std::size_t shown = 0;
+    signatureChecks = 0;
+    builder.build([&](const CandidateChain& chain) {
+        EXPECT_TRUE(chain.badSignature) << "what was not checked does not verify";
+        ++shown;
+        return false;
+    });
+    EXPECT_GT(shown, 0U);
+    EXPECT_EQ(signatureChecks, 256U);
 }
 
 TEST(ChainBuilder, GoesNoFurtherThanItsLimit) {
