@@ -47,6 +47,16 @@ TEST(AnchorFile, HasALimitOnItsSize) {
     EXPECT_FALSE(readPem(asBytes(chain().root.pem() + std::string(kMaximumPemFileSize, '\n'))));
 }
 
+TEST(AnchorFile, HasALimitOnItsCertificates) {
+    std::string text;
+    for (std::size_t i = 0; i < kMaximumCertificatesPerFile; ++i) text += chain().root.pem();
+    ASSERT_LT(text.size(), kMaximumPemFileSize / 2) << "so that it is not the size that is refused";
+    const auto read = readPem(asBytes(text));
+    ASSERT_TRUE(read);
+    EXPECT_EQ(read->size(), 1024U);
+    EXPECT_FALSE(readPem(asBytes(text + chain().root.pem())));
+}
+
 constexpr const char* kStores[] = {"roots", "compat-roots", "user-trust/allow", "user-trust/deny"};
 
 struct Loaded {
