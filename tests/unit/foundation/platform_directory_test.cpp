@@ -2,11 +2,15 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sys/prctl.h>
 #include <sys/stat.h>
+#include <sys/statvfs.h>
 
 #include <filesystem>
 
 #include "support/environment.h"
+#include "support/file_properties.h"
+#include "support/process.h"
 #include "support/temporary_directory.h"
 
 namespace pinwell::foundation {
@@ -102,6 +106,40 @@ TEST(PlatformDirectory, IsTheInstalledOneOtherwise) {
         const ScopedVariable variable("PINWELL_PLATFORM", value);
         EXPECT_THAT(PlatformDirectory::current().path(), testing::EndsWith("/pinwell/platform"));
     }
+}
+
+// What a copy of the probe prints that another user starts, with PINWELL_PLATFORM set.
+std::string probedByAnotherUser(const std::string& probe) {
+    constexpr const char* kOther = "65534";
+    const auto result =
+        test::runProcess({.executable = "/usr/bin/setpriv",
+                          .arguments = {std::string("--reuid=") + kOther, std::string("--regid=") + kOther,
+                                        "--clear-groups", probe},
+                          .environment = {{"PINWELL_PLATFORM", "/some/where"}}});
+    EXPECT_EQ(result.exitStatus, 0) << result.errors;
+    return result.output;
+}
+
+TEST(PlatformDirectory, IsTheInstalledOneForARunWithMoreRightsThanItsCaller) {
+    if (!test::isSuperuser())
+        GTEST_SKIP() << "only a superuser can make a program that runs with other rights";
+    const TemporaryDirectory directory;
+    test::setMode(directory.path(), 0755);
+    const std::string probe = directory / "probe";
+    std::filesystem::copy_file(PLATFORM_DIRECTORY_PROBE, probe);
+    test::setMode(probe, 0755);
+    EXPECT_EQ(probedByAnotherUser(probe), "65534 65534 /some/where\n");
+
+    struct statvfs volume {};
+    ASSERT_EQ(statvfs(probe.c_str(), &volume), 0);
+    if ((volume.f_flag & ST_NOSUID) != 0)
+        GTEST_SKIP() << "set-user-ID bits count for nothing in " << directory.path();
+    if (prctl(PR_GET_NO_NEW_PRIVS, 0, 0, 0, 0) != 0)
+        GTEST_SKIP() << "set-user-ID bits count for nothing in this process";
+    test::setMode(probe, 04755);
+    const std::string printed = probedByAnotherUser(probe);
+    EXPECT_THAT(printed, StartsWith("65534 0 ")) << "runs with the rights of its owner";
+    EXPECT_THAT(printed, testing::EndsWith("/pinwell/platform\n"));
 }
 
 TEST(PlatformDirectory, ListsCertificateFilesInByteOrder) {

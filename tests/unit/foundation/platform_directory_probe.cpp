@@ -1,0 +1,12 @@
+// Prints who asks, with whose rights, and which platform directory they get. A program of its own, so that a
+// test can give a copy of it the set-user-ID bit.
+#include <unistd.h>
+
+#include <iostream>
+
+#include "foundation/platform_directory.h"
+
+int main() {
+    std::cout << getuid() << ' ' << geteuid() << ' '
+              << pinwell::foundation::PlatformDirectory::current().path() << '\n';
+}
