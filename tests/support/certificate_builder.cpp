@@ -36,6 +36,7 @@ using EcdsaHandle = Handle<ECDSA_SIG, ECDSA_SIG_free>;
 using NumberHandle = Handle<BIGNUM, BN_free>;
 using DigestHandle = Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
 using ExtensionHandle = Handle<X509_EXTENSION, X509_EXTENSION_free>;
+using KeyContextHandle = Handle<EVP_PKEY_CTX, EVP_PKEY_CTX_free>;
 using NameHandle = Handle<X509_NAME, X509_NAME_free>;
 using ObjectHandle = Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
 using OctetsHandle = Handle<ASN1_OCTET_STRING, ASN1_OCTET_STRING_free>;
@@ -71,12 +72,25 @@ std::string contents(BIO* bio) {
     return {text, static_cast<std::size_t>(size)};
 }
 
+EVP_PKEY* generateOnDescribedCurve(const char* curve) {
+    const KeyContextHandle context(EVP_PKEY_CTX_new_from_name(nullptr, "EC", nullptr));
+    require(context && EVP_PKEY_keygen_init(context.get()) == 1 &&
+                EVP_PKEY_CTX_set_group_name(context.get(), curve) == 1 &&
+                EVP_PKEY_CTX_set_ec_param_enc(context.get(), OPENSSL_EC_EXPLICIT_CURVE) == 1,
+            "described curve");
+    EVP_PKEY* pair = nullptr;
+    require(EVP_PKEY_generate(context.get(), &pair) == 1, "key generation failed");
+    return pair;
+}
+
 EVP_PKEY* generatePair(KeyKind kind) {
     switch (kind) {
         case KeyKind::p224:
             return EVP_EC_gen("P-224");
         case KeyKind::p256:
             return EVP_EC_gen("P-256");
+        case KeyKind::p256Described:
+            return generateOnDescribedCurve("P-256");
         case KeyKind::p384:
             return EVP_EC_gen("P-384");
         case KeyKind::p521:

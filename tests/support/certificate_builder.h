@@ -23,7 +23,17 @@ struct evp_pkey_st;  // OpenSSL's EVP_PKEY
 
 namespace pinwell::test {
 
-enum class KeyKind { p224, p256, p384, p521, rsa1024, rsa2048, rsa3072, ed25519 };
+enum class KeyKind {
+    p224,
+    p256,
+    p256Described,  // the same curve, described by its numbers instead of named
+    p384,
+    p521,
+    rsa1024,
+    rsa2048,
+    rsa3072,
+    ed25519,
+};
 
 /// A key pair. Copies share it.
 class SigningKey {

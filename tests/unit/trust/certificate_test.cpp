@@ -108,6 +108,14 @@ TEST(Certificate, KnowsTheSizeOfItsKey) {
     EXPECT_EQ(made(fields)->publicKey()->bits(), 2048);
 }
 
+TEST(Certificate, HasNoKeyThatBringsItsOwnCurve) {
+    CertificateFields fields;
+    fields.key = test::SigningKey::cached(test::KeyKind::p256Described, "key");
+    ASSERT_NE(made(fields), nullptr);
+    EXPECT_EQ(made(fields)->publicKey(), nullptr);
+    EXPECT_FALSE(made(fields)->verifiesSignatureOf(*made(fields)));
+}
+
 TEST(Certificate, KeepsDatesBeyondTheTwoDigitYears) {
     CertificateFields fields;
     fields.notAfter = {4102444800};  // 2100-01-01

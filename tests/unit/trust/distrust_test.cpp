@@ -84,6 +84,13 @@ TEST_P(Distrust, HoldsWhenAnotherAuthorityCertifiesTheSameKey) {
     EXPECT_EQ(verdictWithout(intermediate.der), Verdict::deny);
 }
 
+TEST_P(Distrust, HoldsForAKeyThatCannotBeReadHoweverTheSignatureIsEncoded) {
+    fields.leaf.key = SigningKey::cached(KeyKind::p256Described, "described");
+    Scene described(fields);
+    described.denied = {underOtherSignature(described.chain.leaf.der, described.chain.intermediate.key)};
+    EXPECT_EQ(described.verdict(GetParam().policy), Verdict::deny);
+}
+
 TEST_P(Distrust, IsOfThisKeyUnderThisName) {
     CertificateFields sameName = fields.leaf;
     sameName.key = SigningKey::cached(KeyKind::p256, "namesake");
