@@ -216,6 +216,7 @@ const std::vector<CertificateFault>& certificateFaults() {
         {"KeyP224", "a curve of 224 bits", "555 555 555", [](C& c, Chain&) { useKey(c, KeyKind::p224); }},
         {"KeyRsa1024", "an RSA key of 1024 bits", "555 555 555", [](C& c, Chain&) { useKey(c, KeyKind::rsa1024); }},
         {"KeyEd25519", "a kind of key that the policy does not admit", "555 555 555", [](C& c, Chain&) { useKey(c, KeyKind::ed25519); }},
+        {"KeyWithACurveOfItsOwn", "the key describes its curve and names none, so it cannot be read", "566 566 566", [](C& c, Chain&) { useKey(c, KeyKind::p256Described); }},
         // Basic constraints and key usage: a matter of the issuers.
         {"NoBasicConstraints", "has no basic constraints; a leaf needs none", "455 455 455", [](C& c, Chain&) { c.basicConstraints.reset(); }},
         {"NotAnAuthority", "its basic constraints say CA:FALSE", "-55 -55 -55", [](C& c, Chain&) { c.basicConstraints = BasicConstraints{false}; }},

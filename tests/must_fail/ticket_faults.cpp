@@ -202,6 +202,7 @@ const std::vector<TicketFault>& ticketFaults() {
         {"SignerWithTheServersMarker", "the signer has the pinned server's marker", kRefused, [](const S& s, const I&) { return byChain(s, [](ChainFields& f) { f.leaf.markers = {kPinnedServerMarker}; }); }},
         {"IntermediateWithoutItsMarker", "the intermediate lacks its marker", kRefused, [](const S& s, const I&) { return byChain(s, [](ChainFields& f) { f.intermediate.markers.clear(); }); }},
         {"SignerWithASmallKey", "the signer's curve has 224 bits", kRefused, [](const S& s, const I&) { return byChain(s, [](ChainFields& f) { f.leaf.key = SigningKey::cached(KeyKind::p224, "small"); }); }},
+        {"SignerWithACurveOfItsOwn", "the signer's key describes its curve and names none", kRefused, [](const S& s, const I&) { return byChain(s, [](ChainFields& f) { f.leaf.key = SigningKey::cached(KeyKind::p256Described, "described"); }); }},
         {"SignerOverSha1", "the signer's certificate rests on SHA-1", kRefused, [](const S& s, const I&) { return byChain(s, [](ChainFields& f) { f.leaf.digest = SignatureDigest::sha1; }); }},
         {"SignerCorrupt", "the signature of the signer's certificate is corrupt", kRefused, [](const S& s, const I&) { return byChain(s, [](ChainFields& f) { f.leaf.corruptSignature = true; }); }},
         // The signature.
