@@ -109,7 +109,11 @@ Result<void> flush(int descriptor, const std::string& path) {
 Result<void> flushDirectoryOf(const std::string& path) {
     const std::string directoryPath = directoryOf(path);
     const auto directory = openDirectory(directoryPath, LastLink::followed);
-    if (!directory) return directory.error();
+    if (!directory) {
+        // One may write to a directory that one may not read.
+        if (directory.error().code() == EACCES) return {};
+        return directory.error();
+    }
     auto done = flush(directory->get(), directoryPath);
     // EINVAL: a file system (of shared folders, say) that cannot flush directories, fsync(2).
     if (!done && done.error().code() == EINVAL) return {};

@@ -98,7 +98,7 @@ Result<Data> readUpTo(const OpenFile& file, std::uint64_t length);
 Result<void> flush(int descriptor, const std::string& path);
 
 /// The same for the directory that a path's last component stands in, and so for the name of what was made
-/// there; no failure where the file system has no such thing.
+/// there; no failure where the file system has no such thing, or the directory may not be read.
 Result<void> flushDirectoryOf(const std::string& path);
 
 /// Closes and reports what the file system has kept back until now.

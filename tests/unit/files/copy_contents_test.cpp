@@ -32,6 +32,15 @@ TEST_F(CopyOfContents, NeverWritesThroughALink) {
     EXPECT_FALSE(exists(path("elsewhere")));
 }
 
+TEST_F(CopyOfContents, GoesIntoADirectoryThatMayNotBeRead) {
+    const AsOrdinaryUser user(directory.path());
+    writeFile(path("source"), "x");
+    makeDirectory(path("closed"), 0300);
+    EXPECT_THAT(manager->copyContents(url("source"), url("closed/copy")), Succeeds());
+    setMode(path("closed"), 0700);
+    EXPECT_EQ(readFile(path("closed/copy")), "x");
+}
+
 TEST_F(CopyOfContents, TakesRegularFilesOnly) {
     makeDirectory(path("directory"));
     EXPECT_THAT(manager->copyContents(url("directory"), url("copy")), FailsWith(EISDIR, path("directory")));
