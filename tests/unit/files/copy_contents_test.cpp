@@ -34,9 +34,9 @@ TEST_F(CopyOfContents, NeverWritesThroughALink) {
 
 TEST_F(CopyOfContents, GoesIntoADirectoryThatMayNotBeRead) {
     const AsOrdinaryUser user(directory.path());
-    writeFile(path("source"), "x");
+    writeFile(path("ticket"), "x");
     makeDirectory(path("closed"), 0300);
-    EXPECT_THAT(manager->copyContents(url("source"), url("closed/copy")), Succeeds());
+    EXPECT_THAT(manager->copyContents(url("ticket"), url("closed/copy")), Succeeds());
     setMode(path("closed"), 0700);
     EXPECT_EQ(readFile(path("closed/copy")), "x");
 }
