@@ -20,21 +20,15 @@ bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& sou
     // Empty when one is deleted, and behind the next check only then.
     const Data ticket = deleteExisting ? Data{} : readTicket(source, held);
     const bool fitsABlob = !ticket.empty() && ticket.size() <= std::numeric_limits<std::uint32_t>::max();
-    if (!deleteExisting && !fitsABlob) {
-        NoisyLog("Cannot add a new ticket to %@. %@", name, held);
-        return failedToWrite(held, error);
-    }
+    if (!deleteExisting && !fitsABlob) return refuseNewTicket(target, held, error);
     if (deleteExisting && !ticketData()) {
         NoisyLog("Cannot delete an existing ticket in %@ that doesn't exist.", name);
         return failedToWrite(held, error);
     }
 
     Data superblob = superblobWithTicket(signature_.blobs, ticket);
-    if (!deleteExisting && !isReadableSuperblob(superblob)) {
-        held = Error::posix(EFBIG, target.path());
-        NoisyLog("Cannot add a new ticket to %@. %@", name, held);
-        return failedToWrite(held, error);
-    }
+    if (!deleteExisting && !isReadableSuperblob(superblob))
+        return refuseNewTicket(target, Error::posix(EFBIG, target.path()), error);
     if (!superblob.empty() && !writeSignature(std::move(superblob), target, deleteExisting, held))
         return failedToWrite(held, error);
     setAppropriateExitCode(kExitOK);

@@ -94,6 +94,11 @@ Data PWHashedFile::readTicket(const std::optional<URL>& source, std::optional<Er
     return {};
 }
 
+bool PWHashedFile::refuseNewTicket(const URL& target, std::optional<Error> reason, ErrorOut error) {
+    NoisyLog("Cannot add a new ticket to %@. %@", target.lastPathComponent(), reason);
+    return failedToWrite(std::move(reason), error);
+}
+
 bool PWHashedFile::failedToWrite(std::optional<Error> reason, ErrorOut error) {
     setAppropriateExitCode(kExitCannotCreate);
     if (error != nullptr) *error = std::move(reason);

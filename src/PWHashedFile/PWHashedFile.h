@@ -107,6 +107,9 @@ class PWHashedFile {
     /// failed.
     Data readTicket(const std::optional<URL>& source, std::optional<Error>& held) const;
 
+    /// Says that the target gets no new ticket, and why where that is known; then as failedToWrite.
+    bool refuseNewTicket(const URL& target, std::optional<Error> reason, ErrorOut error);
+
     /// How a failed write ends: exit code 73, and the reason handed out, where there is one. Always false.
     bool failedToWrite(std::optional<Error> reason, ErrorOut error);
 

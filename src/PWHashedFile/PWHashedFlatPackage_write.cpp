@@ -18,17 +18,12 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
 
     // Empty when one is deleted, and behind the next check only then.
     const Data ticket = deleteExisting ? Data{} : readTicket(source, held);
-    if (!deleteExisting && !isWritableTicketLength(ticket.size())) {
-        NoisyLog("Cannot add a new ticket to %@. %@", targetName, held);
-        return failedToWrite(held, error);
-    }
+    if (!deleteExisting && !isWritableTicketLength(ticket.size()))
+        return refuseNewTicket(target, held, error);
     const bool hasTicket =
         ticketData().has_value();  // the question reads the trailers, on which all below rests
-    if (!deleteExisting && trailers_.exceedsLimits) {
-        held = Error::posix(EFBIG, target.path());
-        NoisyLog("Cannot add a new ticket to %@. %@", targetName, held);
-        return failedToWrite(held, error);
-    }
+    if (!deleteExisting && trailers_.exceedsLimits)
+        return refuseNewTicket(target, Error::posix(EFBIG, target.path()), error);
     if (deleteExisting && !hasTicket) {
         NoisyLog("Cannot delete an existing ticket in %@ that doesn't exist.", targetName);
         return failedToWrite(held, error);
