@@ -6,7 +6,6 @@
 
 #include "e2e/artefacts.h"
 #include "src/DownloadDelegate.h"
-#include "src/run.h"
 #include "support/code_directory_builder.h"
 #include "support/controller_run.h"
 #include "support/executable_image_builder.h"
@@ -105,16 +104,7 @@ bool ToolRun::passesOffline(const std::string& path) {
 
 int ToolRun::run(const std::string& path, const std::string& answer, std::uint8_t operation) {
     const MessageCapture output(kVerbosityNormal);
-    const https::HTTPResponse response{
-        *URL::fromString("https://api.lumora.example/"), 200, {{"X-Ostrel-Request-UUID", "REQUEST"}}};
-    const auto answerLookup = [&] {
-        const auto completion = platform_.https.sessions.back()->completions.at(0);
-        completion(foundation::toData(answer), response, std::nullopt);
-    };
-    int status = kExitNothingRecorded;
-    const auto ended = platform_.exitStatusOf(
-        [&] { status = runOperation(operation, URL::fileURLWithPath(path), services_, answerLookup); });
-    return ended.value_or(status);
+    return statusOfRun(operation, URL::fileURLWithPath(path), platform_, services_, answer);
 }
 
 }  // namespace pinwell::test

@@ -5,6 +5,7 @@
 
 #include "foundation/base64.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
+#include "src/run.h"
 
 namespace pinwell::test {
 namespace {
@@ -19,6 +20,21 @@ std::shared_ptr<PWHashedFile> makeSignedBundle(TestPlatform& platform) {
 }
 
 }  // namespace
+
+int statusOfRun(std::uint8_t operation, const foundation::URL& path, TestPlatform& platform,
+                const Platform& services, std::string_view answer) {
+    const auto answerLookup = [&] {
+        const https::HTTPResponse response{*foundation::URL::fromString("https://api.lumora.example/"),
+                                           200,
+                                           {{"X-Ostrel-Request-UUID", "REQUEST"}}};
+        const auto completion = platform.https.sessions.back()->completions.at(0);
+        completion(foundation::toData(answer), response, std::nullopt);
+    };
+    int status = kExitNothingRecorded;
+    const auto ended =
+        platform.exitStatusOf([&] { status = runOperation(operation, path, services, answerLookup); });
+    return ended.value_or(status);
+}
 
 ControllerRun::ControllerRun() : file(makeSignedBundle(platform)), controller(file, platform.services()) {}
 

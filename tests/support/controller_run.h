@@ -10,6 +10,11 @@
 
 namespace pinwell::test {
 
+/// What a run of the tool ends with that finds this body in the answer to its lookup, if it asks. The
+/// services are of that platform, but for those that the test has replaced.
+int statusOfRun(std::uint8_t operation, const foundation::URL& path, TestPlatform& platform,
+                const Platform& services, std::string_view answer);
+
 /// A bundle App.app whose cdhash is 20 bytes of 0xAB under algorithm 2, and a controller for it.
 class ControllerRun {
   public:

@@ -4,7 +4,6 @@
 #include <cerrno>
 #include <ostream>
 
-#include "src/run.h"
 #include "support/message_capture.h"
 
 namespace pinwell::test {
@@ -33,17 +32,8 @@ Outcome Stapling::staple(const std::string& path, const Data& ticket) {
 }
 
 int Stapling::run(const URL& path, const Data& ticket) {
-    const Platform services = platform_.servicesWith(*codeSigning_);
-    const https::HTTPResponse response{
-        *URL::fromString("https://api.lumora.example/"), 200, {{"X-Ostrel-Request-UUID", "REQUEST"}}};
-    const auto answerLookup = [&] {
-        const auto completion = platform_.https.sessions.back()->completions.at(0);
-        completion(foundation::toData(ControllerRun::inlineAnswer(ticket)), response, std::nullopt);
-    };
-    int status = kExitNothingRecorded;
-    const auto ended = platform_.exitStatusOf(
-        [&] { status = runOperation(kOperationStaple, path, services, answerLookup); });
-    return ended.value_or(status);
+    return statusOfRun(kOperationStaple, path, platform_, platform_.servicesWith(*codeSigning_),
+                       ControllerRun::inlineAnswer(ticket));
 }
 
 Outcome Stapling::erase(const std::string& path) {
