@@ -79,61 +79,44 @@ TEST(OpaqueCodeDirectory, OfADiskImageHasSixSpecialSlots) {
     EXPECT_EQ(layOutOpaqueCodeDirectory({"ADHOC", 4096, trailer, content}), expected);
 }
 
+/// The long form, of a limit of 4 GiB; `trailerSlots` stand in front of the slots that every signature has.
+Data expectedLongForm(std::uint32_t specialSlots, const Data& trailerSlots, const Data& contentDigest) {
+    return ByteWriter()
+        .be32(0xFADE0C02)
+        .be32(64 + 6 + (specialSlots + 1) * 32)
+        .be32(0x20300)
+        .be32(2)
+        .be32(64 + 6 + specialSlots * 32)
+        .be32(64)
+        .be32(specialSlots)
+        .be32(1)
+        .be32(0xFFFFFFFF)
+        .u8(32)
+        .u8(2)
+        .be16(0)
+        .be64(0)  // spare and scatter offset
+        .be64(0)  // team offset and spare
+        .be64(0x100000000)
+        .text("ADHOC")
+        .u8(0)
+        .bytes(trailerSlots)
+        .bytes(kEmptyRequirementsDigest)
+        .zeros(32)
+        .bytes(contentDigest)
+        .data();
+}
+
 TEST(OpaqueCodeDirectory, OfMoreThan32BitsHasTheLongForm) {
     const Data content(32, std::byte{0xC0});
-    const Data expected = ByteWriter()
-                              .be32(0xFADE0C02)
-                              .be32(64 + 6 + 3 * 32)
-                              .be32(0x20300)
-                              .be32(2)
-                              .be32(64 + 6 + 2 * 32)
-                              .be32(64)
-                              .be32(2)
-                              .be32(1)
-                              .be32(0xFFFFFFFF)
-                              .u8(32)
-                              .u8(2)
-                              .be16(0)
-                              .be64(0)  // spare and scatter offset
-                              .be64(0)  // team offset and spare
-                              .be64(0x100000000)
-                              .text("ADHOC")
-                              .u8(0)
-                              .bytes(kEmptyRequirementsDigest)
-                              .zeros(32)
-                              .bytes(content)
-                              .data();
-    EXPECT_EQ(layOutOpaqueCodeDirectory({"ADHOC", 0x100000000, std::nullopt, content}), expected);
+    EXPECT_EQ(layOutOpaqueCodeDirectory({"ADHOC", 0x100000000, std::nullopt, content}),
+              expectedLongForm(2, {}, content));
 }
 
 TEST(OpaqueCodeDirectory, OfAnImageOfMoreThan32BitsHasTheLongFormAndTheTrailersSlot) {
     const Data content(32, std::byte{0xC0});
     const Data trailer(32, std::byte{0x7D});
-    const Data expected = ByteWriter()
-                              .be32(0xFADE0C02)
-                              .be32(64 + 6 + 7 * 32)
-                              .be32(0x20300)
-                              .be32(2)
-                              .be32(64 + 6 + 6 * 32)
-                              .be32(64)
-                              .be32(6)
-                              .be32(1)
-                              .be32(0xFFFFFFFF)
-                              .u8(32)
-                              .u8(2)
-                              .be16(0)
-                              .be64(0)  // spare and scatter offset
-                              .be64(0)  // team offset and spare
-                              .be64(0x100000000)
-                              .text("ADHOC")
-                              .u8(0)
-                              .bytes(trailer)
-                              .zeros(3 * 32)
-                              .bytes(kEmptyRequirementsDigest)
-                              .zeros(32)
-                              .bytes(content)
-                              .data();
-    EXPECT_EQ(layOutOpaqueCodeDirectory({"ADHOC", 0x100000000, trailer, content}), expected);
+    EXPECT_EQ(layOutOpaqueCodeDirectory({"ADHOC", 0x100000000, trailer, content}),
+              expectedLongForm(6, ByteWriter().bytes(trailer).zeros(3 * 32).data(), content));
 }
 
 TEST(OpaqueCodeDirectory, KeepsTheShortFormUpToTheLast32BitLimit) {
