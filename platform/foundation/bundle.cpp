@@ -60,18 +60,36 @@ std::optional<std::string> executableIn(const std::string& directory, const std:
     return path;
 }
 
-// Only the winner is kept, however many sub-directories there are.
+bool hasExecuteBit(const std::string& path) {
+    struct stat status {};
+    return ::lstat(path.c_str(), &status) == 0 && (status.st_mode & (S_IXUSR | S_IXGRP | S_IXOTH)) != 0;
+}
+
+// Files of one class, of which one alone can be the executable. Keeps the first path and the number of all.
+struct Candidates {
+    std::string first;
+    std::size_t count = 0;
+
+    void add(std::string path) {
+        if (count++ == 0) first = std::move(path);
+    }
+};
+
+// A directory that cannot be read to its end might hold a second candidate.
 std::optional<std::string> executableBelow(const std::string& contents, const std::string& name) {
-    std::optional<std::string> first;
+    Candidates executable;
+    Candidates other;
     std::error_code failure;
     std::filesystem::directory_iterator entry(contents, failure);
     for (; !failure && entry != std::filesystem::directory_iterator(); entry.increment(failure)) {
-        const std::string& directory = entry->path().native();
-        if ((first && directory >= first->substr(0, first->rfind('/'))) || !isOwnEntry(directory, S_IFDIR))
-            continue;
-        if (auto found = executableIn(directory, name)) first = std::move(found);
+        if (!isOwnEntry(entry->path().native(), S_IFDIR)) continue;
+        auto found = executableIn(entry->path().native(), name);
+        if (!found) continue;
+        (hasExecuteBit(*found) ? executable : other).add(*std::move(found));
     }
-    return first;
+    const Candidates& counted = executable.count > 0 ? executable : other;
+    if (failure || counted.count != 1) return std::nullopt;
+    return counted.first;
 }
 
 }  // namespace

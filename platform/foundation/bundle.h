@@ -10,9 +10,10 @@ namespace pinwell::foundation {
 ///
 /// The property list is Contents/Info.plist, else Resources/Info.plist, else Info.plist; the executable is
 /// the one it names (CFBundleExecutable), or else the directory's own name without the extension, and must be
-/// a regular file in a direct sub-directory of Contents (found, not assumed; the first in byte order wins),
-/// or, for a bundle without Contents, in its root. Neither the executable nor that sub-directory may be a
-/// symbolic link. A directory with Versions/Current is a framework: property list in that version's
+/// a regular file in a direct sub-directory of Contents (found, not assumed), or, for a bundle without
+/// Contents, in its root. Of several files below Contents, those without any execute bit do not count if
+/// another has one; if two are left, the bundle has none. Neither the executable nor that sub-directory may
+/// be a symbolic link. A directory with Versions/Current is a framework: property list in that version's
 /// Resources, executable in that version's root. A name that holds a slash or is "." or ".." names nothing.
 std::optional<std::string> mainExecutableOfBundle(const std::string& path);
 

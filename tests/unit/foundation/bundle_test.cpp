@@ -4,6 +4,7 @@
 #include <sys/stat.h>
 
 #include <filesystem>
+#include <stdexcept>
 
 #include "foundation/property_list.h"
 #include "support/temporary_directory.h"
@@ -23,6 +24,12 @@ class SampleBundle {
 
     SampleBundle& file(std::string_view name, std::string_view contents = "x") {
         test::writeFile(*this / name, contents);
+        return *this;
+    }
+    SampleBundle& program(std::string_view name, mode_t executeBits = S_IXUSR) {
+        file(name);
+        const std::string path = *this / name;
+        if (chmod(path.c_str(), S_IRUSR | S_IWUSR | executeBits) != 0) throw std::runtime_error(path);
         return *this;
     }
     SampleBundle& list(std::string_view name, const Value& executable) {
@@ -103,13 +110,32 @@ TEST(Bundle, HasNoneWhenTheNamedFileIsMissing) {
     EXPECT_EQ(bundle.mainExecutable(), std::nullopt);
 }
 
-TEST(Bundle, TakesTheFirstSubDirectoryInByteOrder) {
+TEST(Bundle, HasNoneIfTwoFilesCouldBeIt) {
     SampleBundle bundle("Sample.app");
-    bundle.file("Contents/b/Sample")
-        .file("Contents/a/other")
-        .file("Contents/B/Sample")
-        .file("Contents/c/Sample");
-    EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/B/Sample");
+    bundle.file("Contents/a/Sample");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/a/Sample");
+    bundle.file("Contents/b/Sample");
+    EXPECT_EQ(bundle.mainExecutable(), std::nullopt);
+}
+
+TEST(Bundle, HasNoneIfTwoExecutableFilesCouldBeIt) {
+    SampleBundle bundle("Sample.app");
+    bundle.program("Contents/a/Sample").program("Contents/b/Sample").file("Contents/c/Sample");
+    EXPECT_EQ(bundle.mainExecutable(), std::nullopt);
+}
+
+TEST(Bundle, CountsFilesWithoutExecuteBitOnlyIfNoneHasOne) {
+    for (const mode_t bit : {mode_t{S_IXUSR}, mode_t{S_IXGRP}, mode_t{S_IXOTH}}) {
+        SampleBundle bundle("Sample.app");
+        bundle.file("Contents/a/Sample").file("Contents/c/Sample").program("Contents/b/Sample", bit);
+        EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/b/Sample") << bit;
+    }
+}
+
+TEST(Bundle, CountsNoLinkAmongTheFilesThatCouldBeItsExecutable) {
+    SampleBundle bundle("Sample.app");
+    bundle.file("Contents/a/Sample").link("Contents/b/Sample", "../a/Sample").link("Contents/c", "a");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/a/Sample");
 }
 
 TEST(Bundle, LooksOnlyInDirectSubDirectoriesOfContents) {
