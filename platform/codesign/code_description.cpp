@@ -124,11 +124,12 @@ void describeSlice(const FileCode& code, std::optional<FileRange> place, SliceDe
 
 void describeImage(const FileCode& code, CodeDescription& into) {
     const std::vector<ImageSlice> slices = readSlices(code.source());
+    const ImageSlice& preferred = preferredSlice(slices);
     for (const ImageSlice& slice : slices) {
         SliceDescription& shown = into.slices.emplace_back();
         shown.cpuType = slice.cpuType;
         shown.range = slice.range;
-        shown.preferred = &slice == &preferredSlice(slices);
+        shown.preferred = &slice == &preferred;
         guarded([&] { describeSlice(code, findImageSignature(code.source(), slice), shown); },
                 [&](Status, const char* reason) { shown.problem = reason; });
     }

@@ -1,6 +1,8 @@
 #include "codesign/executable_image.h"
 
 #include <algorithm>
+#include <utility>
+#include <vector>
 
 #include "codesign/code_error.h"
 #include "foundation/byte_reader.h"
@@ -23,6 +25,49 @@ constexpr std::size_t kThinHeaderSize64 = 32;
 constexpr std::uint32_t kLoadCommandHeaderSize = 8;
 constexpr std::uint32_t kSignatureCommandSize = 16;
 
+/// What is read at once of a list. Most lists of load commands fit.
+constexpr std::size_t kPieceSize = std::size_t{16} * 1024;
+
+/// The bytes of a range of a file, in order, of which one piece is in memory at a time.
+class PieceReader {
+  public:
+    /// `range` must lie within `source`.
+    PieceReader(const ByteSource& source, const FileRange& range)
+        : source_(source), position_(range.offset), remaining_(range.length) {}
+
+    /// The next `length` bytes, at most kPieceSize, valid until the next call.
+    ByteView next(std::size_t length, const char* what) {
+        if (remaining_ < length) refuse(std::string(what) + " is cut short");
+        if (piece_.size() - used_ < length) {
+            piece_ = source_.read(position_,
+                                  static_cast<std::size_t>(std::min<std::uint64_t>(kPieceSize, remaining_)));
+            used_ = 0;
+        }
+        const ByteView bytes = ByteView(piece_).subspan(used_, length);
+        used_ += length;
+        moveBy(length);
+        return bytes;
+    }
+
+    void skip(std::uint64_t length, const char* what) {
+        if (remaining_ < length) refuse(std::string(what) + " is cut short");
+        used_ += static_cast<std::size_t>(std::min<std::uint64_t>(length, piece_.size() - used_));
+        moveBy(length);
+    }
+
+  private:
+    void moveBy(std::uint64_t length) {
+        position_ += length;
+        remaining_ -= length;
+    }
+
+    const ByteSource& source_;
+    std::uint64_t position_;  // in the file
+    std::uint64_t remaining_;
+    Data piece_;
+    std::size_t used_ = 0;  // of the piece
+};
+
 /// Reads 32-bit numbers in the order of one image.
 class OrderedReader {
   public:
@@ -30,9 +75,6 @@ class OrderedReader {
 
     std::uint32_t u32(std::string_view what) { return bigEndian_ ? reader_.be32(what) : reader_.le32(what); }
     void skip(std::uint64_t length, std::string_view what) { reader_.skip(length, what); }
-    OrderedReader take(std::uint64_t length, std::string_view what) {
-        return OrderedReader(reader_.bytes(length, what), bigEndian_);
-    }
 
   private:
     ByteReader reader_;
@@ -64,12 +106,31 @@ void requireInside(const FileRange& inner, std::uint64_t first, std::uint64_t si
 void requireSeparate(const std::vector<ImageSlice>& slices) {
     std::vector<FileRange> ranges;
     for (const ImageSlice& slice : slices) ranges.push_back(slice.range);
-    std::sort(ranges.begin(), ranges.end(),
-              [](const FileRange& a, const FileRange& b) { return a.offset < b.offset; });
+    std::sort(ranges.begin(), ranges.end(), [](const FileRange& a, const FileRange& b) {
+        return a.offset < b.offset || (a.offset == b.offset && a.length < b.length);
+    });
     const auto overlap = std::adjacent_find(
         ranges.begin(), ranges.end(),
         [](const FileRange& a, const FileRange& b) { return b.offset - a.offset < a.length; });
     if (overlap != ranges.end()) refuse("slices overlap");
+}
+
+void requireDistinct(const std::vector<ImageSlice>& slices) {
+    std::vector<std::pair<std::uint32_t, std::uint32_t>> processors;
+    for (const ImageSlice& slice : slices)
+        processors.emplace_back(slice.cpuType, slice.cpuSubtype & ~kCpuSubtypeCapabilities);
+    std::sort(processors.begin(), processors.end());
+    if (std::adjacent_find(processors.begin(), processors.end()) != processors.end())
+        refuse("two slices of one CPU type and subtype");
+}
+
+ImageSlice readSliceEntry(ByteReader entry, bool is64) {
+    ImageSlice slice;
+    slice.cpuType = entry.be32("CPU type");
+    slice.cpuSubtype = entry.be32("CPU subtype");
+    slice.range.offset = is64 ? entry.be64("slice offset") : entry.be32("slice offset");
+    slice.range.length = is64 ? entry.be64("slice size") : entry.be32("slice size");
+    return slice;
 }
 
 std::vector<ImageSlice> readUniversal(const ByteSource& source) {
@@ -77,38 +138,38 @@ std::vector<ImageSlice> readUniversal(const ByteSource& source) {
     ByteReader header(start);
     const bool is64 = header.be32("magic") == kUniversalMagic64;
     const std::uint32_t count = header.be32("slice count");
-    if (count == 0 || count > kMaximumSlices) refuse("unlikely number of slices");
+    if (count == 0) refuse("a universal image without slices");
 
-    const std::size_t listSize = count * (is64 ? kSliceEntrySize64 : kSliceEntrySize32);
-    const Data list = source.read(kUniversalHeaderSize, listSize);
-    ByteReader entries(list, kUniversalHeaderSize);
+    const std::size_t entrySize = is64 ? kSliceEntrySize64 : kSliceEntrySize32;
+    const FileRange list = {kUniversalHeaderSize, std::uint64_t{count} * entrySize};
+    requireInside(list, 0, source.size(), "the list of slices");
+    PieceReader entries(source, list);
     std::vector<ImageSlice> slices;
     for (std::uint32_t i = 0; i < count; ++i) {
-        ImageSlice slice;
-        slice.cpuType = entries.be32("CPU type");
-        entries.skip(4, "CPU subtype");
-        slice.range.offset = is64 ? entries.be64("slice offset") : entries.be32("slice offset");
-        slice.range.length = is64 ? entries.be64("slice size") : entries.be32("slice size");
-        entries.skip(is64 ? 8 : 4, "slice alignment");
-        requireInside(slice.range, kUniversalHeaderSize + listSize, source.size(), "a slice");
-        slices.push_back(slice);
+        slices.push_back(readSliceEntry(ByteReader(entries.next(entrySize, "the list of slices")), is64));
+        requireInside(slices.back().range, list.offset + list.length, source.size(), "a slice");
     }
     requireSeparate(slices);
+    requireDistinct(slices);
     return slices;
 }
 
 /// The signature that the load commands give, relative to the image.
-std::optional<FileRange> walkLoadCommands(OrderedReader commands, std::uint32_t count) {
+std::optional<FileRange> walkLoadCommands(PieceReader commands, bool bigEndian, std::uint32_t count) {
     std::optional<FileRange> found;
     // Every command takes eight bytes of a bounded space at least, so a count that lies ends the walk early.
     for (std::uint32_t i = 0; i < count; ++i) {
-        const std::uint32_t command = commands.u32("load command");
-        const std::uint32_t size = commands.u32("load command size");
+        OrderedReader header(commands.next(kLoadCommandHeaderSize, "a load command"), bigEndian);
+        const std::uint32_t command = header.u32("load command");
+        const std::uint32_t size = header.u32("load command size");
         if (size < kLoadCommandHeaderSize) refuse("a load command is shorter than its header");
-        OrderedReader body = commands.take(size - kLoadCommandHeaderSize, "load command");
-        if (command != kLoadCommandSignature) continue;
+        if (command != kLoadCommandSignature) {
+            commands.skip(size - kLoadCommandHeaderSize, "a load command");
+            continue;
+        }
         if (size != kSignatureCommandSize) refuse("the signature's load command has a wrong size");
         if (found) refuse("two load commands give a signature");
+        OrderedReader body(commands.next(size - kLoadCommandHeaderSize, "a load command"), bigEndian);
         found.emplace();
         found->offset = body.u32("signature offset");
         found->length = body.u32("signature length");
@@ -131,7 +192,10 @@ std::vector<ImageSlice> readSlices(const ByteSource& source) {
     if (!magic) refuse("not an executable image");
     OrderedReader reader(start, magic->bigEndian);
     reader.skip(4, "magic");
-    return {ImageSlice{reader.u32("CPU type"), FileRange{0, source.size()}}};
+    ImageSlice whole;
+    whole.cpuType = reader.u32("CPU type");
+    whole.range.length = source.size();
+    return {whole};
 }
 
 const ImageSlice& preferredSlice(const std::vector<ImageSlice>& slices) {
@@ -154,12 +218,11 @@ std::optional<FileRange> findImageSignature(const ByteSource& source, const Imag
     header.skip(16, "magic, CPU and file type");
     const std::uint32_t count = header.u32("count of load commands");
     const std::uint32_t size = header.u32("size of load commands");
-    if (size > kMaximumLoadCommandsSize) refuse("too many load commands");
     const FileRange commands = {magic->is64 ? kThinHeaderSize64 : kThinHeaderSize32, size};
     requireInside(commands, 0, slice.range.length, "the list of load commands");
 
-    const Data bytes = source.read(slice.range.offset + commands.offset, size);
-    std::optional<FileRange> signature = walkLoadCommands(OrderedReader(bytes, magic->bigEndian), count);
+    std::optional<FileRange> signature = walkLoadCommands(
+        PieceReader(source, {slice.range.offset + commands.offset, size}), magic->bigEndian, count);
     if (!signature || signature->length == 0) return std::nullopt;
     requireInside(*signature, commands.offset + commands.length, slice.range.length, "the signature");
     signature->offset += slice.range.offset;

@@ -23,9 +23,13 @@
 // | 8      | 20 a slice | CPU type, CPU subtype, offset, size, alignment (4 each)                       |
 // | 8      | 32 a slice | CPU type, CPU subtype (4 each), offset, size (8 each), alignment, spare (4)   |
 //
-// Each slice is a thin image. Refused: no slices, more than the limit, slices that overlap each other or the
-// list, slices that reach past the file; load commands that do not fit the space set aside for them, two that
-// give a signature, a signature that overlaps the load commands or reaches past its slice.
+// Each slice is a thin image. Refused: no slices, slices that overlap each other or the list, slices that
+// reach past the file, two slices of one CPU type and subtype (a loader takes one of them, and not
+// necessarily the one whose hash was asked for); load commands that do not fit the space set aside for them,
+// two that give a signature, a signature that overlaps the load commands or reaches past its slice.
+//
+// There is no limit on the number of slices or load commands. Both lists are read piece by piece, so that
+// work and memory grow with what is in the file and not with what it claims.
 #pragma once
 
 #include <cstdint>
@@ -40,11 +44,8 @@ inline constexpr std::uint32_t kCpuType64Arm = 0x0100000C;
 inline constexpr std::uint32_t kCpuType64X86 = 0x01000007;
 inline constexpr std::uint32_t kLoadCommandSignature = 0x1D;
 
-/// There are about a dozen CPU types.
-inline constexpr std::uint32_t kMaximumSlices = 64;
-
-/// The load commands of very large programs take some 100 KiB.
-inline constexpr std::uint32_t kMaximumLoadCommandsSize = 4 * 1024 * 1024;
+/// The upper byte of a CPU subtype says what the code makes use of, not what it runs on.
+inline constexpr std::uint32_t kCpuSubtypeCapabilities = 0xFF000000;
 
 /// A part of a file.
 struct FileRange {
@@ -57,6 +58,7 @@ struct FileRange {
 /// One thin image and where it stands in its file.
 struct ImageSlice {
     std::uint32_t cpuType = 0;
+    std::uint32_t cpuSubtype = 0;  // as stated, capabilities included
     FileRange range;
 };
 

@@ -102,6 +102,11 @@ UniversalImageBuilder& UniversalImageBuilder::sizeOf(std::size_t slice, std::uin
     return *this;
 }
 
+UniversalImageBuilder& UniversalImageBuilder::subtypeOf(std::size_t slice, std::uint32_t value) {
+    subtypes_[slice] = value;
+    return *this;
+}
+
 Data UniversalImageBuilder::build() const {
     std::vector<std::pair<std::uint32_t, Data>> slices = slices_;
     if (slices.empty()) slices.emplace_back(kSampleArm, ExecutableImageBuilder().build());
@@ -115,7 +120,7 @@ Data UniversalImageBuilder::build() const {
         const Data& image = slices[i].second;
         const std::uint64_t offset = offsets_.contains(i) ? offsets_.at(i) : next;
         const std::uint64_t size = sizes_.contains(i) ? sizes_.at(i) : image.size();
-        list.be32(slices[i].first).be32(0);
+        list.be32(slices[i].first).be32(subtypes_.contains(i) ? subtypes_.at(i) : 0);
         if (wide_) {
             list.be64(offset).be64(size).be32(6).be32(0);
         } else {

@@ -80,6 +80,7 @@ class UniversalImageBuilder {
     UniversalImageBuilder& count(std::uint32_t value);
     UniversalImageBuilder& offsetOf(std::size_t slice, std::uint64_t value);
     UniversalImageBuilder& sizeOf(std::size_t slice, std::uint64_t value);
+    UniversalImageBuilder& subtypeOf(std::size_t slice, std::uint32_t value);
 
     Data build() const;
 
@@ -89,6 +90,7 @@ class UniversalImageBuilder {
     std::optional<std::uint32_t> count_;
     std::map<std::size_t, std::uint64_t> offsets_;
     std::map<std::size_t, std::uint64_t> sizes_;
+    std::map<std::size_t, std::uint32_t> subtypes_;  // 0 where none is given
 };
 
 /// A bundle directory. By default its property list names the executable "Sample", which stands in

@@ -35,12 +35,14 @@ class CountingSource final : public codesign::ByteSource {
 
     mutable std::size_t reads = 0;
     mutable std::size_t bytesRead = 0;
+    mutable std::size_t largest = 0;  // of one read
 
   private:
     // What stands behind the bytes, up to the size, is zero.
     std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const override {
         ++reads;
         bytesRead += buffer.size();
+        largest = std::max(largest, buffer.size());
         for (std::size_t i = 0; i < buffer.size(); ++i)
             buffer[i] =
                 offset + i < bytes_.size() ? bytes_[static_cast<std::size_t>(offset + i)] : std::byte{};
@@ -141,22 +143,30 @@ TEST(BoundedWork, UniversalImageOfBillionsOfSlicesIsLeftAfterItsHeader) {
     const CountingSource source(UniversalImageBuilder().count(~0U).build(), std::uint64_t{1} << 40U);
     EXPECT_TRUE(isRefused([&] { codesign::readSlices(source); }));
     EXPECT_LE(source.reads, 3U);
-    EXPECT_LE(source.bytesRead, kRefusal);
+    EXPECT_LE(source.bytesRead, 64 * kKibibyte);
 }
 
-// The smallest load command there is, as often as the limit has room for it.
-TEST(BoundedWork, LoadCommandsAreReadOnce) {
+// Three gigabytes of list that are nothing but a claim: the first entry that is not there ends it.
+TEST(BoundedWork, ListOfSlicesOverAHoleIsLeftAtItsFirstEmptyEntry) {
+    const CountingSource source(UniversalImageBuilder().count(150'000'000).build(), std::uint64_t{1} << 40U);
+    const AllocationCount count;
+    EXPECT_TRUE(isRefused([&] { codesign::readSlices(source); }));
+    EXPECT_LE(source.bytesRead, 64 * kKibibyte);
+    EXPECT_LE(count.bytes(), 64 * kKibibyte);
+}
+
+// The smallest load command there is, many times over.
+TEST(BoundedWork, LoadCommandsAreReadOnceAndPieceByPiece) {
+    constexpr std::uint32_t kCommands = 1'000'000;
     ByteWriter image;
-    const std::uint32_t commands = codesign::kMaximumLoadCommandsSize / 8;
-    image.be32(0xFEEDFACF).be32(kSampleArm).be32(0).be32(2).be32(commands);
-    image.be32(codesign::kMaximumLoadCommandsSize).zeros(8);
-    for (std::uint32_t i = 0; i < commands; ++i) image.be32(0x1B).be32(8);
+    image.be32(0xFEEDFACF).be32(kSampleArm).be32(0).be32(2).be32(kCommands).be32(kCommands * 8).zeros(8);
+    for (std::uint32_t i = 0; i < kCommands; ++i) image.be32(0x1B).be32(8);
     const CountingSource source(image.data());
     const auto slices = codesign::readSlices(source);
     ASSERT_EQ(slices.size(), 1U);
     EXPECT_EQ(codesign::findImageSignature(source, slices.front()), std::nullopt);
-    EXPECT_LE(source.reads, 8U);
-    EXPECT_LE(source.bytesRead, codesign::kMaximumLoadCommandsSize + kRefusal);
+    EXPECT_LE(source.bytesRead, kCommands * 8 + kRefusal);
+    EXPECT_LE(source.largest, 64 * kKibibyte);
 }
 
 TEST(BoundedWork, LoadCommandsOfNoLengthAreNotWalkedForEver) {
