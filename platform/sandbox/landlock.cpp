@@ -1,0 +1,126 @@
+#include "sandbox/landlock.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdint>
+#include <system_error>
+
+#include "foundation/file_io.h"
+
+namespace pinwell::sandbox {
+namespace {
+
+using foundation::FileDescriptor;
+
+// The kernel's numbers (include/uapi/linux/landlock.h). Spelled out because the headers of Linux 6.1, which
+// Debian 12 builds with, know the first version only in part.
+enum FileRight : std::uint64_t {
+    execute = 1U << 0U,
+    writeFile = 1U << 1U,
+    readFile = 1U << 2U,
+    readDirectory = 1U << 3U,
+    removeDirectory = 1U << 4U,
+    removeFile = 1U << 5U,
+    makeDevice = 1U << 6U,
+    makeDirectory = 1U << 7U,
+    makeRegular = 1U << 8U,
+    makeSocket = 1U << 9U,
+    makeFifo = 1U << 10U,
+    makeBlock = 1U << 11U,
+    makeSymbolicLink = 1U << 12U,
+    refer = 1U << 13U,          // version 2: renames from one directory to another
+    truncateFile = 1U << 14U,   // version 3
+    deviceControl = 1U << 15U,  // version 5
+};
+enum NetworkRight : std::uint64_t { bindTcp = 1U << 0U, connectTcp = 1U << 1U };      // version 4
+enum Scope : std::uint64_t { abstractSockets = 1U << 0U, signalSending = 1U << 1U };  // version 6
+
+constexpr int kVersionWithRenames = 2;
+constexpr int kVersionWithTruncation = 3;
+constexpr int kVersionWithNetwork = 4;
+constexpr int kVersionWithDeviceControl = 5;
+constexpr int kVersionWithScopes = 6;
+
+struct RulesetAttributes {
+    std::uint64_t files = 0;
+    std::uint64_t network = 0;
+    std::uint64_t scopes = 0;
+};
+
+struct [[gnu::packed]] PathRule {
+    std::uint64_t rights = 0;
+    std::int32_t parent = -1;
+};
+
+constexpr unsigned kVersionQuestion = 1;
+constexpr int kPathRule = 1;
+
+constexpr std::uint64_t kReadRights = readFile | readDirectory;
+constexpr std::uint64_t kWriteRights = kReadRights | writeFile | truncateFile | removeDirectory | removeFile |
+                                       makeDirectory | makeRegular | refer;
+// Those that a rule on something else than a directory may give.
+constexpr std::uint64_t kRightsToOneFile = execute | writeFile | readFile | truncateFile | deviceControl;
+
+std::uint64_t knownFileRights(int version) {
+    std::uint64_t rights = refer - 1U;  // all of the first version
+    if (version >= kVersionWithRenames) rights |= refer;
+    if (version >= kVersionWithTruncation) rights |= truncateFile;
+    if (version >= kVersionWithDeviceControl) rights |= deviceControl;
+    return rights;
+}
+
+std::uint64_t deniedNetworkRights(int version, Network network) {
+    if (version < kVersionWithNetwork || network == Network::listen) return 0;
+    return network == Network::connect ? std::uint64_t{bindTcp} : bindTcp | connectTcp;
+}
+
+std::string lastReason() {
+    return std::generic_category().message(errno);
+}
+
+std::optional<std::string> addRule(int ruleset, const FileRule& rule, std::uint64_t known) {
+    const FileDescriptor place(open(rule.path.c_str(), O_PATH | O_CLOEXEC));
+    struct stat status {};
+    if (!place || fstat(place.get(), &status) != 0) return std::nullopt;  // nothing there to give rights to
+    PathRule added;
+    added.rights = (rule.access == Access::write ? kWriteRights : kReadRights) & known;
+    if (!S_ISDIR(status.st_mode)) added.rights &= kRightsToOneFile;
+    added.parent = place.get();
+    if (syscall(SYS_landlock_add_rule, ruleset, kPathRule, &added, 0U) == 0) return std::nullopt;
+    return rule.path + ": " + lastReason();
+}
+
+}  // namespace
+
+int landlockVersion() {
+    const long version = syscall(SYS_landlock_create_ruleset, nullptr, std::size_t{0}, kVersionQuestion);
+    return version < 0 ? 0 : static_cast<int>(version);
+}
+
+std::optional<std::string> restrictFiles(const FileRules& files, Network network) {
+    const int version = landlockVersion();
+    if (version == 0) return lastReason();
+    // The first version forbids every rename from one directory to another, which is how a file is replaced.
+    const bool writes = std::any_of(files.begin(), files.end(),
+                                    [](const FileRule& rule) { return rule.access == Access::write; });
+    if (writes && version < kVersionWithRenames) return "this kernel's version of it forbids renaming files";
+
+    RulesetAttributes attributes;
+    attributes.files = knownFileRights(version);
+    attributes.network = deniedNetworkRights(version, network);
+    if (version >= kVersionWithScopes) attributes.scopes = abstractSockets | signalSending;
+    const FileDescriptor ruleset(
+        static_cast<int>(syscall(SYS_landlock_create_ruleset, &attributes, sizeof attributes, 0U)));
+    if (!ruleset) return lastReason();
+    for (const FileRule& rule : files)
+        if (auto reason = addRule(ruleset.get(), rule, attributes.files)) return reason;
+    if (syscall(SYS_landlock_restrict_self, ruleset.get(), 0U) != 0) return lastReason();
+    return std::nullopt;
+}
+
+}  // namespace pinwell::sandbox

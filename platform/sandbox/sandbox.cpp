@@ -1,0 +1,45 @@
+#include "sandbox/sandbox.h"
+
+#include <sys/prctl.h>
+#include <sys/resource.h>
+
+#include <iterator>
+#include <utility>
+
+#include "sandbox/landlock.h"
+#include "sandbox/system_calls.h"
+
+namespace pinwell::sandbox {
+
+#ifdef PINWELL_SANDBOX
+
+std::vector<std::string> confine(const Confinement& confinement) {
+    std::vector<std::string> missing;
+    // Both facilities ask for it of a process that is not the superuser's.
+    if (prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) != 0) missing.emplace_back("no_new_privs is not in force");
+    const auto files = restrictFiles(confinement.files, confinement.network);
+    if (files) missing.push_back("Landlock is not in force: " + *files);
+    const auto calls = restrictCalls(confinement.calls, files ? FilesAre::open : FilesAre::restricted);
+    if (calls) missing.push_back("seccomp is not in force: " + *calls);
+    return missing;
+}
+
+#else
+
+std::vector<std::string> confine(const Confinement&) {
+    return {"Landlock and seccomp are not in force: this program was built without them"};
+}
+
+#endif
+
+void forbidCoreDumps() {
+    const rlimit none{0, 0};
+    setrlimit(RLIMIT_CORE, &none);
+    prctl(PR_SET_DUMPABLE, 0, 0, 0, 0);
+}
+
+void append(FileRules& rules, FileRules more) {
+    rules.insert(rules.end(), std::make_move_iterator(more.begin()), std::make_move_iterator(more.end()));
+}
+
+}  // namespace pinwell::sandbox

@@ -1,0 +1,94 @@
+#include "confined_child.h"
+
+#include <gtest/gtest.h>
+#include <seccomp.h>
+#include <sys/prctl.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <system_error>
+
+namespace pinwell::test {
+namespace {
+
+constexpr int kUnconfined = 250;
+
+// The child's exit status, and what it wrote.
+Outcome inChild(const std::function<int(int output)>& body) {
+    std::array<int, 2> ends{};
+    if (pipe(ends.data()) != 0) throw std::system_error(errno, std::generic_category(), "pipe");
+    const pid_t child = fork();
+    if (child < 0) throw std::system_error(errno, std::generic_category(), "fork");
+    if (child == 0) {
+        close(ends[0]);
+        _exit(body(ends[1]));
+    }
+    close(ends[1]);
+    Outcome outcome;
+    std::array<char, 512> piece{};
+    for (ssize_t count = 0; (count = read(ends[0], piece.data(), piece.size())) > 0;)
+        outcome.said.append(piece.data(), static_cast<std::size_t>(count));
+    close(ends[0]);
+    int status = 0;
+    waitpid(child, &status, 0);
+    if (!WIFEXITED(status)) ADD_FAILURE() << "the child was ended by signal " << WTERMSIG(status);
+    outcome.result = WEXITSTATUS(status);
+    return outcome;
+}
+
+// A failed write shows as what is missing from the output.
+void say(int output, const std::vector<std::string>& lines) {
+    for (const std::string& line : lines)
+        [[maybe_unused]] const ssize_t written = write(output, (line + "\n").data(), line.size() + 1);
+}
+
+void refuse(scmp_filter_ctx filter, int reason, int call) {
+    seccomp_rule_add(filter, SCMP_ACT_ERRNO(static_cast<unsigned>(reason)), call, 0);
+}
+
+void takeAway(Missing missing) {
+    const scmp_filter_ctx filter = seccomp_init(SCMP_ACT_ALLOW);
+    if (missing == Missing::landlock) {
+        refuse(filter, ENOSYS, SCMP_SYS(landlock_create_ruleset));
+    } else {
+        refuse(filter, ENOSYS, SCMP_SYS(seccomp));
+        seccomp_rule_add(filter, SCMP_ACT_ERRNO(EINVAL), SCMP_SYS(prctl), 1,
+                         SCMP_A0(SCMP_CMP_EQ, PR_SET_SECCOMP));
+    }
+    if (seccomp_load(filter) != 0) _exit(kUnconfined);
+    seccomp_release(filter);
+}
+
+}  // namespace
+
+int whenConfined(const sandbox::Confinement& confinement, const Attempt& attempt) {
+    const Outcome outcome = inChild([&](int output) {
+        const auto missing = sandbox::confine(confinement);
+        say(output, missing);
+        return missing.empty() ? attempt() : kUnconfined;
+    });
+    EXPECT_EQ(outcome.said, "");
+    return outcome.result;
+}
+
+Outcome whenConfinedWithout(Missing missing, const sandbox::Confinement& confinement,
+                            const Attempt& attempt) {
+    return inChild([&](int output) {
+        takeAway(missing);
+        say(output, sandbox::confine(confinement));
+        return attempt();
+    });
+}
+
+std::optional<std::string> confinementMissing() {
+    const Outcome outcome = inChild([](int output) {
+        say(output, sandbox::confine({.files = {{"/", sandbox::Access::write}}}));
+        return 0;
+    });
+    if (outcome.said.empty()) return std::nullopt;
+    return outcome.said;
+}
+
+}  // namespace pinwell::test

@@ -1,0 +1,347 @@
+#include <fcntl.h>
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <netinet/in.h>
+#include <sched.h>
+#include <sys/ioctl.h>
+#include <sys/mman.h>
+#include <sys/prctl.h>
+#include <sys/resource.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
+#include <unistd.h>
+#include <csignal>
+
+#include <array>
+#include <cerrno>
+#include <thread>
+
+#include "confined_child.h"
+#include "support/file_properties.h"
+#include "support/temporary_directory.h"
+
+namespace pinwell::test {
+namespace {
+
+using sandbox::Access;
+using sandbox::Calls;
+using sandbox::Confinement;
+using sandbox::Network;
+
+int opening(const std::string& path, int flags) {
+    return reasonOf(open(path.c_str(), flags | O_CLOEXEC, 0600));
+}
+
+class Confined : public testing::Test {
+  protected:
+    void SetUp() override {
+        if (const auto missing = confinementMissing())
+            GTEST_SKIP() << "nothing is confined here: " << *missing;
+        writeFile(directory / "given/file", "given");
+        writeFile(directory / "given/below/file", "given");
+        writeFile(directory / "other/file", "other");
+    }
+
+    std::string given(std::string_view name) const { return directory / "given/" + std::string(name); }
+
+    Confinement reading() const { return {.files = {{directory / "given", Access::read}}}; }
+    Confinement writing() const { return {.files = {{directory / "given", Access::write}}}; }
+
+    TemporaryDirectory directory;
+};
+
+using ConfinedFiles = Confined;
+
+TEST_F(ConfinedFiles, AreReadOnlyWhereNamed) {
+    EXPECT_EQ(whenConfined(reading(), [&] { return opening(given("below/file"), O_RDONLY); }), 0);
+    EXPECT_EQ(whenConfined(reading(), [&] { return opening(directory / "other/file", O_RDONLY); }), EACCES);
+    EXPECT_EQ(whenConfined(reading(), [&] { return opening(directory / "other", O_RDONLY); }), EACCES);
+    EXPECT_EQ(whenConfined(reading(), [&] { return opening("/etc/passwd", O_RDONLY); }), EACCES);
+}
+
+TEST_F(ConfinedFiles, AreNotReachedByALinkFromWhereTheyAreNamed) {
+    makeLink(directory / "other/file", given("link"));
+    EXPECT_EQ(whenConfined(reading(), [&] { return opening(given("link"), O_RDONLY); }), EACCES);
+}
+
+TEST_F(ConfinedFiles, AreNotWrittenWhereOnlyReadingIsNamed) {
+    EXPECT_EQ(whenConfined(reading(), [&] { return opening(given("file"), O_WRONLY); }), EACCES);
+    EXPECT_EQ(whenConfined(reading(), [&] { return opening(given("file"), O_RDONLY | O_TRUNC); }), EACCES);
+    EXPECT_EQ(whenConfined(reading(), [&] { return opening(given("new"), O_WRONLY | O_CREAT); }), EACCES);
+    EXPECT_EQ(whenConfined(reading(), [&] { return reasonOf(unlink(given("file").c_str())); }), EACCES);
+    EXPECT_EQ(whenConfined(reading(), [&] { return reasonOf(mkdir(given("new").c_str(), 0700)); }), EACCES);
+}
+
+TEST_F(ConfinedFiles, AreMadeReplacedAndRemovedWhereWritingIsNamed) {
+    const int result = whenConfined(writing(), [&] {
+        if (const int reason = reasonOf(mkdir(given("new").c_str(), 0700))) return reason;
+        if (const int reason = opening(given("new/file"), O_WRONLY | O_CREAT)) return reason;
+        if (const int reason = reasonOf(truncate(given("new/file").c_str(), 5))) return reason;
+        if (const int reason = reasonOf(rename(given("new/file").c_str(), given("file").c_str())))
+            return reason;
+        return reasonOf(rmdir(given("new").c_str()));
+    });
+    EXPECT_EQ(result, 0);
+    EXPECT_EQ(readFile(given("file")), std::string(5, '\0'));
+}
+
+TEST_F(ConfinedFiles, AreNotMovedOutOfWhereWritingIsNamed) {
+    const auto attempt = [&] {
+        return reasonOf(rename(given("file").c_str(), (directory / "other/taken").c_str()));
+    };
+    EXPECT_NE(whenConfined(writing(), attempt), 0);
+    EXPECT_EQ(readFile(given("file")), "given");
+}
+
+TEST_F(ConfinedFiles, AreNeitherLinksNorDevicesNorPipes) {
+    EXPECT_EQ(whenConfined(writing(), [&] { return reasonOf(symlink("/etc", given("link").c_str())); }),
+              EACCES);
+    EXPECT_NE(whenConfined(writing(), [&] { return reasonOf(mkfifo(given("pipe").c_str(), 0600)); }), 0);
+}
+
+TEST_F(ConfinedFiles, AreNamedByARuleForOneFileAlone) {
+    const Confinement one{.files = {{given("file"), Access::write}}};
+    EXPECT_EQ(whenConfined(one, [&] { return opening(given("file"), O_RDWR); }), 0);
+    EXPECT_EQ(whenConfined(one, [&] { return opening(given("below/file"), O_RDONLY); }), EACCES);
+    EXPECT_EQ(whenConfined(one, [&] { return reasonOf(unlink(given("file").c_str())); }), EACCES);
+}
+
+TEST_F(ConfinedFiles, ThatDoNotExistGiveNoRight) {
+    const Confinement missing{.files = {{given("file"), Access::read}, {directory / "none", Access::write}}};
+    EXPECT_EQ(whenConfined(missing, [&] { return opening(given("file"), O_RDONLY); }), 0);
+    EXPECT_EQ(whenConfined(missing, [&] { return reasonOf(mkdir((directory / "none").c_str(), 0700)); }),
+              EACCES);
+}
+
+TEST_F(ConfinedFiles, StayOpenWhenTheyWereOpenBefore) {
+    const int before = open((directory / "other/file").c_str(), O_RDONLY | O_CLOEXEC);
+    char letter = 0;
+    EXPECT_EQ(whenConfined(reading(), [&] { return reasonOf(read(before, &letter, 1)); }), 0);
+    close(before);
+}
+
+/// A call that nobody may make any more. Its arguments do no harm where it may be made.
+struct ForbiddenCall {
+    const char* name;
+    Attempt attempt;
+};
+
+void PrintTo(const ForbiddenCall& call, std::ostream* stream) {
+    *stream << call.name;
+}
+
+const std::array<const char*, 2> kNoWords{nullptr, nullptr};
+
+const std::vector<ForbiddenCall> kForbiddenCalls{
+    {"bpf", [] { return reasonOf(syscall(SYS_bpf, 0, nullptr, 0)); }},
+    {"chroot", [] { return reasonOf(chroot("/")); }},
+    {"deleteModule", [] { return reasonOf(syscall(SYS_delete_module, nullptr, 0)); }},
+    {"ioUring", [] { return reasonOf(syscall(SYS_io_uring_setup, 1, nullptr)); }},
+    {"keyctl", [] { return reasonOf(syscall(SYS_keyctl, 0, 0, 0, 0, 0)); }},
+    {"killOfTheParent", [] { return reasonOf(kill(getppid(), 0)); }},
+    {"mount", [] { return reasonOf(syscall(SYS_mount, nullptr, nullptr, nullptr, 0, nullptr)); }},
+    {"openByHandle", [] { return reasonOf(syscall(SYS_open_by_handle_at, -1, nullptr, 0)); }},
+    {"openTree", [] { return reasonOf(syscall(SYS_open_tree, -1, "", 0)); }},
+    {"packetSocket", [] { return reasonOf(socket(AF_PACKET, SOCK_DGRAM | SOCK_CLOEXEC, 0)); }},
+    {"perfEvents", [] { return reasonOf(syscall(SYS_perf_event_open, nullptr, 0, -1, -1, 0)); }},
+    {"prlimitOfTheParent", [] { return reasonOf(prlimit(getppid(), RLIMIT_CORE, nullptr, nullptr)); }},
+    {"processMemory", [] { return reasonOf(syscall(SYS_process_vm_readv, 1, nullptr, 0, nullptr, 0, 0)); }},
+    {"setuid", [] { return reasonOf(setuid(getuid())); }},
+    {"swapoff", [] { return reasonOf(syscall(SYS_swapoff, nullptr)); }},
+    {"terminalInput", [] { return reasonOf(ioctl(-1, TIOCSTI, "x")); }},
+    {"umount", [] { return reasonOf(syscall(SYS_umount2, nullptr, 0)); }},
+    {"unshare", [] { return reasonOf(unshare(0)); }},
+    {"userfaultfd", [] { return reasonOf(syscall(SYS_userfaultfd, 0)); }},
+};
+
+#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
+constexpr bool kSanitized = true;  // its own tools start programs, trace and fork
+#else
+constexpr bool kSanitized = false;
+#endif
+
+const std::vector<ForbiddenCall> kForbiddenUnlessSanitized{
+    {"exec",
+     [] {
+         return reasonOf(
+             syscall(SYS_execve, "/proc/self/none", kNoWords.data(), kNoWords.data()));  // NOLINT: no words
+     }},
+    {"execByDescriptor",
+     [] { return reasonOf(syscall(SYS_execveat, -1, "", kNoWords.data(), kNoWords.data(), 0)); }},
+    {"fork",
+     [] {
+         const long child = syscall(SYS_clone, SIGCHLD, nullptr, nullptr, nullptr, 0);
+         if (child == 0) _exit(0);
+         return reasonOf(child);
+     }},
+    {"ptrace", [] { return reasonOf(syscall(SYS_ptrace, 0, 0, nullptr, nullptr)); }},
+};
+
+class ForbiddenCalls : public Confined, public testing::WithParamInterface<ForbiddenCall> {};
+
+TEST_P(ForbiddenCalls, AreRefusedToAService) {
+    EXPECT_EQ(whenConfined(writing(), GetParam().attempt), EPERM);
+}
+
+TEST_P(ForbiddenCalls, AreRefusedToAReader) {
+    Confinement confinement = reading();
+    confinement.calls = Calls::reading;
+    EXPECT_THAT(whenConfined(confinement, GetParam().attempt), testing::AnyOf(EPERM, ENOSYS));
+}
+
+std::string nameOf(const testing::TestParamInfo<ForbiddenCall>& info) {
+    return info.param.name;
+}
+INSTANTIATE_TEST_SUITE_P(Everywhere, ForbiddenCalls, testing::ValuesIn(kForbiddenCalls), nameOf);
+INSTANTIATE_TEST_SUITE_P(UnlessSanitized, ForbiddenCalls,
+                         testing::ValuesIn(kSanitized ? std::vector<ForbiddenCall>{}
+                                                      : kForbiddenUnlessSanitized),
+                         nameOf);
+GTEST_ALLOW_UNINSTANTIATED_PARAMETERIZED_TEST(ForbiddenCalls);
+
+using ConfinedReader = Confined;
+
+TEST_F(ConfinedReader, ChangesNothingOfAFile) {
+    const std::string file = given("file");
+    // Even where a rule would let it.
+    Confinement confinement = writing();
+    confinement.calls = Calls::reading;
+    const auto refused = testing::AnyOf(EPERM, ENOSYS);
+    EXPECT_THAT(whenConfined(confinement, [&] { return reasonOf(chmod(file.c_str(), 0)); }), refused);
+    EXPECT_THAT(whenConfined(confinement, [&] { return reasonOf(chown(file.c_str(), 0, 0)); }), refused);
+    EXPECT_THAT(whenConfined(confinement, [&] { return reasonOf(utimensat(0, file.c_str(), nullptr, 0)); }),
+                refused);
+    EXPECT_THAT(whenConfined(confinement, [&] { return reasonOf(truncate(file.c_str(), 0)); }), refused);
+    EXPECT_THAT(whenConfined(confinement, [&] { return reasonOf(unlink(file.c_str())); }), refused);
+    EXPECT_THAT(whenConfined(confinement, [&] { return reasonOf(rename(file.c_str(), file.c_str())); }),
+                refused);
+    EXPECT_THAT(whenConfined(confinement, [&] { return opening(file, O_WRONLY); }), refused);
+    EXPECT_THAT(whenConfined(confinement, [&] { return opening(file, O_RDONLY | O_TRUNC); }), refused);
+    EXPECT_THAT(whenConfined(confinement, [&] { return opening(given("new"), O_RDONLY | O_CREAT); }),
+                refused);
+    EXPECT_THAT(whenConfined(confinement, [&] { return opening(given(""), O_RDWR | O_TMPFILE); }), refused);
+    EXPECT_EQ(readFile(file), "given");
+}
+
+TEST_F(ConfinedReader, HasNoSockets) {
+    Confinement confinement = reading();
+    confinement.calls = Calls::reading;
+    for (const int family : {AF_UNIX, AF_INET, AF_INET6, AF_NETLINK}) {
+        EXPECT_THAT(whenConfined(confinement,
+                                 [&] { return reasonOf(socket(family, SOCK_STREAM | SOCK_CLOEXEC, 0)); }),
+                    testing::AnyOf(EPERM, ENOSYS))
+            << family;
+    }
+}
+
+TEST_F(ConfinedReader, StillHasThreadsAndMemory) {
+    Confinement confinement = reading();
+    confinement.calls = Calls::reading;
+    const int result = whenConfined(confinement, [&] {
+        int seen = 1;
+        std::thread([&] { seen = opening(given("file"), O_RDONLY); }).join();
+        return seen;
+    });
+    EXPECT_EQ(result, 0);
+}
+
+using ConfinedService = Confined;
+
+TEST_F(ConfinedService, HasTheSocketsOfNamesAndConnections) {
+    for (const int family : {AF_UNIX, AF_INET, AF_INET6}) {
+        EXPECT_EQ(
+            whenConfined(writing(), [&] { return reasonOf(socket(family, SOCK_STREAM | SOCK_CLOEXEC, 0)); }),
+            0);
+    }
+    EXPECT_EQ(
+        whenConfined(writing(), [] { return reasonOf(socket(AF_NETLINK, SOCK_RAW | SOCK_CLOEXEC, 0)); }), 0);
+}
+
+int binding() {
+    const int number = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    sockaddr_in address{};
+    address.sin_family = AF_INET;
+    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+    // NOLINTNEXTLINE: the interface of sockets
+    return reasonOf(bind(number, reinterpret_cast<const sockaddr*>(&address), sizeof address));
+}
+
+int connecting() {
+    const int number = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+    sockaddr_in address{};
+    address.sin_family = AF_INET;
+    address.sin_port = htons(1);  // where nobody listens
+    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+    // NOLINTNEXTLINE: the interface of sockets
+    return reasonOf(connect(number, reinterpret_cast<const sockaddr*>(&address), sizeof address));
+}
+
+TEST_F(ConfinedService, UsesTcpAsItWasGiven) {
+    if (syscall(SYS_landlock_create_ruleset, nullptr, 0, 1) < 4)
+        GTEST_SKIP() << "this kernel's Landlock does not know TCP";
+    Confinement confinement = reading();
+    EXPECT_EQ(whenConfined(confinement, connecting), EACCES);
+    EXPECT_EQ(whenConfined(confinement, binding), EACCES);
+    confinement.network = Network::connect;
+    EXPECT_EQ(whenConfined(confinement, connecting), ECONNREFUSED);
+    EXPECT_EQ(whenConfined(confinement, binding), EACCES);
+    confinement.network = Network::listen;
+    EXPECT_EQ(whenConfined(confinement, binding), 0);
+}
+
+TEST_F(ConfinedService, GainsNoPrivileges) {
+    EXPECT_EQ(whenConfined(writing(), [] { return prctl(PR_GET_NO_NEW_PRIVS, 0, 0, 0, 0); }), 1);
+}
+
+using KernelWithoutAFacility = Confined;
+
+TEST_F(KernelWithoutAFacility, LeavesFilesAsTheyWereAndSaysSo) {
+    const Outcome outcome = whenConfinedWithout(Missing::landlock, reading(),
+                                                [&] { return opening(directory / "other/file", O_RDWR); });
+    EXPECT_EQ(outcome.said, "Landlock is not in force: Function not implemented\n");
+    EXPECT_EQ(outcome.result, 0);
+}
+
+TEST_F(KernelWithoutAFacility, StillHasTheOther) {
+    const auto mounting = [] { return reasonOf(syscall(SYS_umount2, nullptr, 0)); };
+    EXPECT_EQ(whenConfinedWithout(Missing::landlock, reading(), mounting).result, EPERM);
+
+    const Outcome outcome = whenConfinedWithout(Missing::seccomp, reading(),
+                                                [&] { return opening(directory / "other/file", O_RDONLY); });
+    EXPECT_THAT(outcome.said, testing::StartsWith("seccomp is not in force: "));
+    EXPECT_EQ(outcome.result, EACCES);
+}
+
+TEST_F(KernelWithoutAFacility, StillKeepsAReaderFromWriting) {
+    Confinement confinement = reading();
+    confinement.calls = Calls::reading;
+    const auto refused = testing::AnyOf(EPERM, ENOSYS);
+    const auto attempt = [&] { return opening(given("file"), O_WRONLY); };
+    EXPECT_THAT(whenConfinedWithout(Missing::landlock, confinement, attempt).result, refused);
+
+    struct {
+        std::uint64_t flags, mode, resolve;
+    } how{O_WRONLY, 0, 0};
+    const auto around = [&] {
+        return reasonOf(syscall(SYS_openat2, AT_FDCWD, given("file").c_str(), &how, sizeof how));
+    };
+    EXPECT_THAT(whenConfinedWithout(Missing::landlock, confinement, around).result, refused);
+}
+
+TEST(CoreDumps, AreForbiddenForGood) {
+    const pid_t child = fork();
+    if (child == 0) {
+        sandbox::forbidCoreDumps();
+        rlimit limit{};
+        getrlimit(RLIMIT_CORE, &limit);
+        _exit(limit.rlim_max == 0 && prctl(PR_GET_DUMPABLE, 0, 0, 0, 0) == 0 ? 0 : 1);
+    }
+    int status = 0;
+    waitpid(child, &status, 0);
+    EXPECT_EQ(status, 0);
+}
+
+}  // namespace
+}  // namespace pinwell::test
