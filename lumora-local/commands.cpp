@@ -23,15 +23,36 @@ SignedRecord signRecord(const Registry& registry, Record record) {
     return {std::move(record), std::move(ticket)};
 }
 
-std::vector<Record> putAll(const Registry& registry, const std::vector<Record>& records) {
+std::vector<Record> putAll(const Registry& registry, const std::vector<Record>& records, Occasion occasion) {
     std::vector<SignedRecord> signedRecords;
-    std::vector<Record> answer;
+    std::vector<Record> put;
     for (const Record& record : records) {
         signedRecords.push_back(signRecord(registry, record));
-        answer.push_back(signedRecords.back().record);
+        put.push_back(signedRecords.back().record);
     }
-    registry.store.put(registry.environment, signedRecords);
-    return answer;
+    occasion.time = registry.now();
+    occasion.actor = registry.actor;
+    registry.store.put(registry.environment, signedRecords, occasion);
+    return put;
+}
+
+Record recordOfArtefact(const Registry& registry, const std::string& path) {
+    Artefact artefact = registry.hasher.examine(path);
+    Record record;
+    record.name = recordName(artefact.own);
+    record.label = std::move(artefact.label);
+    record.hashes = std::move(artefact.hashes);
+    return record;
+}
+
+Record recordOfName(const std::string& name, const std::string& label) {
+    std::optional<CodeHash> hash = parseRecordName(name);
+    if (!hash) throw Failure(EX_USAGE, format("%@ is not the name of a record", name));
+    Record record;
+    record.name = name;
+    record.label = label.empty() ? name : label;
+    record.hashes.push_back(*std::move(hash));
+    return record;
 }
 
 /// A record's name has the shape of a relative path, and a file may have that name: the record goes first.
@@ -64,27 +85,29 @@ Value asValue(const Record& record) {
 
 }  // namespace
 
-std::vector<Record> issue(const Registry& registry, const std::vector<std::string>& paths, bool asAsset) {
+std::vector<Record> issue(const Registry& registry, const IssueRequest& request) {
     std::vector<Record> records;
-    for (const std::string& path : paths) {
-        Artefact artefact = registry.hasher.examine(path);
-        Record record;
-        record.name = recordName(artefact.own);
-        record.label = std::move(artefact.label);
-        record.hashes = std::move(artefact.hashes);
-        record.asAsset = asAsset;
-        records.push_back(std::move(record));
-    }
-    return putAll(registry, records);
+    for (const std::string& name : request.recordNames) records.push_back(recordOfName(name, request.label));
+    std::vector<Record> ofArtefacts;
+    for (const std::string& path : request.paths) ofArtefacts.push_back(recordOfArtefact(registry, path));
+    records.insert(records.begin(), ofArtefacts.begin(), ofArtefacts.end());
+    for (Record& record : records) record.asAsset = request.asAsset;
+    Occasion occasion;
+    occasion.comment = request.comment;
+    occasion.reinstates = request.reinstates;
+    return putAll(registry, records, std::move(occasion));
 }
 
-std::vector<Record> revoke(const Registry& registry, const std::vector<std::string>& subjects) {
+std::vector<Record> revoke(const Registry& registry, const RevokeRequest& request) {
     std::vector<Record> records;
-    for (const std::string& subject : subjects) {
+    for (const std::string& subject : request.subjects) {
         records.push_back(recordOf(registry, subject));
         records.back().revoked = true;
     }
-    return putAll(registry, records);
+    Occasion occasion;
+    occasion.reason = request.reason;
+    occasion.comment = request.comment;
+    return putAll(registry, records, std::move(occasion));
 }
 
 std::string describeRecords(const std::vector<Record>& records) {

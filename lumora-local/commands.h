@@ -21,16 +21,36 @@ struct Registry {
     const TicketSigner& signer;
     ArtefactHasher& hasher;
     Environment environment = Environment::production;
+    std::string actor;  // who does it, for the log
     std::function<foundation::Date()> now = foundation::Date::now;
 };
 
-/// A ticket for each artefact, all or none. An earlier record of the same artefact is replaced, a revoked one
-/// included. Answers the records in the order of `paths`. Throws Failure.
-std::vector<Record> issue(const Registry& registry, const std::vector<std::string>& paths, bool asAsset);
+/// What to issue tickets for, and how.
+struct IssueRequest {
+    std::vector<std::string> paths;        // artefacts
+    std::vector<std::string> recordNames;  // of artefacts that are not here; each ticket lists that one hash
+    std::string label;                     // of `recordNames`; empty: the record's name
+    bool asAsset = false;
+    bool reinstates = false;  // revoked records become valid again
+    std::string comment;      // for the log
+};
 
-/// A revoked ticket in the place of the record that each subject names, all or none. A subject is a record's
-/// name or an artefact's path. What has no record is an error (EX_DATAERR). Throws Failure.
-std::vector<Record> revoke(const Registry& registry, const std::vector<std::string>& subjects);
+/// What to revoke, and why.
+struct RevokeRequest {
+    std::vector<std::string> subjects;  // names of records or paths of artefacts
+    Reason reason = Reason::unspecified;
+    std::string comment;  // for the log
+};
+
+/// Issues a ticket for each artefact and each record name, all or none. An earlier record of the same
+/// artefact is replaced; a revoked one is refused (EX_DATAERR), unless the request reinstates. Returns the
+/// records in the order of the request, artefacts first. Throws Failure: EX_USAGE for a name that is no
+/// record's.
+std::vector<Record> issue(const Registry& registry, const IssueRequest& request);
+
+/// Puts a revoked ticket in the place of the record that each subject names, all or none. What has no record
+/// is an error (EX_DATAERR). Returns the records in the order of the request. Throws Failure.
+std::vector<Record> revoke(const Registry& registry, const RevokeRequest& request);
 
 /// For people: one line a record, tab-separated: status, name, delivery, signature time, number of hashes,
 /// label.

@@ -13,10 +13,14 @@
 #include "foundation/process.h"
 #include "lumora-local/commands.h"
 #include "lumora-local/failure.h"
+#include "lumora-local/history.h"
 #include "lumora-local/pinwell_artefact_hasher.h"
+#include "lumora-local/rfc3339.h"
 #include "lumora-local/samples.h"
 #include "lumora-local/serve_command.h"
 #include "lumora-local/service_directory.h"
+#include "lumora-local/service_place.h"
+#include "lumora-local/sqlite_store.h"
 
 namespace {
 
@@ -29,9 +33,19 @@ struct Arguments {
     std::vector<std::string> hosts;
     std::uint16_t port = kDefaultPort;
     std::vector<std::string> subjects;
+    std::vector<std::string> recordNames;
+    std::string label;
+    std::string reason = std::string(toString(Reason::unspecified));
+    std::string comment;
+    bool reinstates = false;
     std::string environment = "production";
     bool asAsset = false;
     bool asJson = false;
+    std::string record;
+    std::string since;
+    std::string head;
+    bool showsHead = false;
+    bool verifies = false;
     std::string listen;
     std::string readyFile;
     bool updatePlatform = false;
@@ -49,6 +63,13 @@ void writeText(const std::string& text) {
     if (!written || std::fflush(stdout) != 0) throw Failure(EX_IOERR, "cannot write to standard output");
 }
 
+/// Part of a longer text; its last part is flushed when the program ends well.
+void writePart(std::string_view text) {
+    if (std::fwrite(text.data(), 1, text.size(), stdout) != text.size()) {
+        throw Failure(EX_IOERR, "cannot write to standard output");
+    }
+}
+
 void complain(std::string_view text) {
     writeLine(stderr, "lumora-local: " + std::string(text));
 }
@@ -63,39 +84,103 @@ void runInit(const Arguments& arguments) {
         }
         service.hosts.push_back(*canonical);
     }
-    const auto directory = ServiceDirectory::create(arguments.directory, service, foundation::Date::now());
+    const std::string directoryPath = requireDirectory(arguments.directory);
+    const auto directory = ServiceDirectory::create(directoryPath, service, foundation::Date::now());
     writeText(foundation::format(
         "Made a record service for %@.\n"
         "Start it:         lumora-local serve %@\n"
         "Point pinwell at: PINWELL_PLATFORM=%@\n",
-        toString(directory.advertisedEndpoint()), arguments.directory, directory.platformPath()));
+        toString(directory.advertisedEndpoint()), directoryPath, directory.platformPath()));
 }
 
-/// Runs one of the commands that work on records.
+ServiceDirectory openService(const Arguments& arguments) {
+    return ServiceDirectory::open(requireDirectory(arguments.directory));
+}
+
+/// Runs one of the commands that change records.
 template <class Command>
 void withRegistry(const Arguments& arguments, Command&& command) {
-    const auto directory = ServiceDirectory::open(arguments.directory);
+    const auto directory = openService(arguments);
     const TicketSigner signer(directory.signerKeyPath(), directory.signerChainPaths());
-    RecordStore store(directory.storePath());
+    SqliteStore store(directory.storePath());
     const std::unique_ptr<ArtefactHasher> hasher = makePinwellArtefactHasher();
-    const Registry registry{store, signer, *hasher, parseEnvironment(arguments.environment).value()};
-    writeText(describeRecords(command(registry)));
+    const Registry registry{store, signer, *hasher, parseEnvironment(arguments.environment).value(),
+                            nameOfCaller()};
+    const std::vector<Record> records = command(registry);
+    writeText(arguments.asJson ? recordsAsJson(records) : describeRecords(records));
 }
 
-void runIssue(const Arguments& arguments) {
-    withRegistry(arguments, [&](const Registry& registry) {
-        return issue(registry, arguments.subjects, arguments.asAsset);
-    });
+void runIssue(Arguments& arguments) {
+    takeDirectory(arguments.directory, arguments.subjects);
+    if (arguments.subjects.empty() && arguments.recordNames.empty()) {
+        throw Failure(EX_USAGE, "issue needs an ARTEFACT or --record");
+    }
+    if (arguments.recordNames.empty() && !arguments.label.empty()) {
+        throw Failure(EX_USAGE, "--label goes with --record");
+    }
+    if (arguments.reinstates && arguments.comment.empty()) {
+        throw Failure(EX_USAGE, "--reinstate needs --comment TEXT");
+    }
+    const IssueRequest request{arguments.subjects, arguments.recordNames, arguments.label,
+                               arguments.asAsset,  arguments.reinstates,  arguments.comment};
+    withRegistry(arguments, [&](const Registry& registry) { return issue(registry, request); });
 }
 
-void runRevoke(const Arguments& arguments) {
-    withRegistry(arguments, [&](const Registry& registry) { return revoke(registry, arguments.subjects); });
+void runRevoke(Arguments& arguments) {
+    takeDirectory(arguments.directory, arguments.subjects);
+    if (arguments.subjects.empty()) throw Failure(EX_USAGE, "revoke needs an ARTEFACT or a RECORDNAME");
+    const RevokeRequest request{arguments.subjects, parseReason(arguments.reason).value(), arguments.comment};
+    withRegistry(arguments, [&](const Registry& registry) { return revoke(registry, request); });
 }
 
 void runList(const Arguments& arguments) {
-    RecordStore store(ServiceDirectory::open(arguments.directory).storePath());
+    SqliteStore store(openService(arguments).storePath());
     const auto records = store.list(parseEnvironment(arguments.environment).value());
     writeText(arguments.asJson ? recordsAsJson(records) : describeRecords(records));
+}
+
+/// `--head DIR` means the directory: what a hash looks like is known.
+void sortOutHead(Arguments& arguments) {
+    const bool isHash = arguments.head.size() == hashBeforeTheFirstEvent().size() &&
+                        arguments.head.find_first_not_of("0123456789abcdef") == std::string::npos;
+    if (isHash || arguments.head.empty()) return;
+    if (!arguments.directory.empty()) {
+        throw Failure(EX_USAGE, foundation::format("%@ is not the hash of an event", arguments.head));
+    }
+    arguments.directory = std::move(arguments.head);
+    arguments.head.clear();
+}
+
+void runLog(Arguments& arguments) {
+    sortOutHead(arguments);
+    if (!arguments.head.empty() && !arguments.verifies) {
+        throw Failure(EX_USAGE, "--head HASH goes with --verify; --head alone prints the last event's hash");
+    }
+    EventQuery query;
+    if (!arguments.record.empty()) query.record = arguments.record;
+    if (!arguments.since.empty()) {
+        query.since = parseRfc3339(arguments.since);
+        if (!query.since) {
+            throw Failure(EX_USAGE, foundation::format("%@ is no time: 2026-11-20 or 2026-11-20T19:55:00Z",
+                                                       arguments.since));
+        }
+    }
+    SqliteStore store(openService(arguments).storePath());
+    if (arguments.verifies) {
+        const std::optional<std::string> known =
+            arguments.head.empty() ? std::nullopt : std::optional(arguments.head);
+        const HistorySummary summary = verifyHistory(store, known);
+        if (arguments.showsHead && arguments.head.empty()) {
+            writeText(summary.head + "\n");
+        } else {
+            writeText(foundation::format("%zu events, the chain is whole and ends with %s\n", summary.events,
+                                         summary.head));
+        }
+    } else if (arguments.showsHead) {
+        writeText(store.headHash() + "\n");
+    } else {
+        writeEvents(store, query, arguments.asJson, writePart);
+    }
 }
 
 void runSample(const Arguments& arguments) {
@@ -127,21 +212,71 @@ void runServe(const Arguments& arguments) {
                                      const std::lock_guard lock(mutex);
                                      complain(line);
                                  }};
-    serve(ServiceDirectory::open(arguments.directory), options, output, stop.get());
+    serve(openService(arguments), options, output, stop.get());
 }
 
-void addEnvironment(CLI::App* command, Arguments& arguments) {
+constexpr const char* kServiceHelp = "The service (default: $LUMORA_DIR)";
+
+void addEnvironment(CLI::App& command, Arguments& arguments) {
     command
-        ->add_option("--environment", arguments.environment, "The set of records: production or development")
+        .add_option("--environment", arguments.environment, "The set of records: production or development")
         ->check(CLI::IsMember({"production", "development"}))
         ->capture_default_str();
+}
+
+void addJson(CLI::App& command, Arguments& arguments) {
+    command.add_flag("--json", arguments.asJson, "As one JSON document");
+}
+
+void addComment(CLI::App& command, Arguments& arguments) {
+    command.add_option("--comment", arguments.comment, "Text for the log");
+}
+
+void declareIssue(CLI::App& issue, Arguments& arguments) {
+    issue.add_option("ARTEFACT", arguments.subjects, "A bundle, disk image or package");
+    issue
+        .add_option("--record", arguments.recordNames,
+                    "The name of a record, for an artefact that is not here: 2/2/HEX")
+        ->allow_extra_args(false);
+    issue.add_option("--label", arguments.label, "What the --record is for (default: its name)");
+    issue.add_flag("--asset", arguments.asAsset, "Deliver by download (always so above 1 MiB)");
+    issue.add_flag("--reinstate", arguments.reinstates, "Make revoked records valid again; needs --comment");
+    addComment(issue, arguments);
+    addJson(issue, arguments);
+    addEnvironment(issue, arguments);
+}
+
+void declareRevoke(CLI::App& revoke, Arguments& arguments) {
+    revoke.add_option("ARTEFACT|RECORDNAME", arguments.subjects,
+                      "What was issued, or the name of its record");
+    revoke.add_option("--reason", arguments.reason, "Why, for the log")
+        ->check(CLI::IsMember(reasonNames()))
+        ->capture_default_str();
+    addComment(revoke, arguments);
+    addJson(revoke, arguments);
+    addEnvironment(revoke, arguments);
+}
+
+void declareLog(CLI::App& log, Arguments& arguments) {
+    log.add_option("--record", arguments.record, "Only events about this record");
+    log.add_option("--since", arguments.since,
+                   "Only events of this time and later: 2026-11-20 or 2026-11-20T19:55:00Z");
+    addJson(log, arguments);
+    log.add_flag("--verify", arguments.verifies, "Check the whole log; 78 if it is broken");
+    log.add_option("--head", arguments.head,
+                   "Print the hash of the last event; with --verify: an event that must be there")
+        ->expected(0, 1);
 }
 
 void declareCommands(CLI::App& app, Arguments& arguments) {
     const auto add = [&](const char* name, const char* help, const char* directoryHelp, auto run) {
         CLI::App* command = app.add_subcommand(name, help);
-        command->add_option("DIR", arguments.directory, directoryHelp)->required();
-        command->callback([&arguments, run] { run(arguments); });
+        command->add_option("DIR", arguments.directory, directoryHelp);
+        command->callback([&arguments, command, run] {
+            const CLI::Option* head = command->get_option_no_throw("--head");
+            arguments.showsHead = head != nullptr && head->count() > 0;
+            run(arguments);
+        });
         return command;
     };
     CLI::App* init = add("init", "Make a service: keys, certificates, an empty store",
@@ -153,25 +288,21 @@ void declareCommands(CLI::App& app, Arguments& arguments) {
         ->check(CLI::Range(1, 65535))
         ->capture_default_str();
 
-    CLI::App* issue = add("issue", "Issue a ticket for each artefact", "The service", runIssue);
-    issue->add_option("ARTEFACT", arguments.subjects, "A bundle, disk image or package")->required();
-    issue->add_flag("--asset", arguments.asAsset, "Deliver by download (always so above 1 MiB)");
-    addEnvironment(issue, arguments);
+    declareIssue(*add("issue", "Issue a ticket for each artefact", kServiceHelp, runIssue), arguments);
+    declareRevoke(*add("revoke", "Replace issued tickets by revoked ones", kServiceHelp, runRevoke),
+                  arguments);
 
-    CLI::App* revoke = add("revoke", "Replace issued tickets by revoked ones", "The service", runRevoke);
-    revoke
-        ->add_option("ARTEFACT|RECORDNAME", arguments.subjects, "What was issued, or the name of its record")
-        ->required();
-    addEnvironment(revoke, arguments);
+    CLI::App* list = add("list", "List the records", kServiceHelp, runList);
+    addJson(*list, arguments);
+    addEnvironment(*list, arguments);
 
-    CLI::App* list = add("list", "List the records", "The service", runList);
-    list->add_flag("--json", arguments.asJson, "As one JSON document");
-    addEnvironment(list, arguments);
+    declareLog(*add("log", "Show what was done to the records, or check it", kServiceHelp, runLog),
+               arguments);
 
     add("sample", "Write a sample of each kind of artefact", "Where to write them", runSample);
 
     CLI::App* serve =
-        add("serve", "Answer lookups over HTTPS until SIGTERM or SIGINT", "The service", runServe);
+        add("serve", "Answer lookups over HTTPS until SIGTERM or SIGINT", kServiceHelp, runServe);
     serve->add_option("--listen", arguments.listen,
                       "ADDRESS:PORT instead of what platform.json says; port 0: any free one");
     serve->add_option("--ready-file", arguments.readyFile, "Gets the service's URL once it listens");

@@ -1,273 +1,40 @@
 #include "lumora-local/record_store.h"
 
-#include <SQLiteCpp/SQLiteCpp.h>
-#include <sqlite3.h>
-
-#include <functional>
-#include <limits>
-
 #include "foundation/format.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/file_writing.h"
 #include "lumora-local/sha256.h"
 
 namespace pinwell::lumora {
-namespace {
 
-using foundation::ByteView;
-using foundation::Data;
-using foundation::Date;
-using foundation::format;
-
-// How long a writer waits for another process's write.
-constexpr int kBusyTimeoutMilliseconds = 10'000;
-
-constexpr int kSchemaVersion = 1;
-constexpr const char* kSchema = R"(
-    CREATE TABLE record (
-        environment TEXT NOT NULL,
-        name        TEXT NOT NULL,
-        label       TEXT NOT NULL,
-        revoked     INTEGER NOT NULL,
-        signed_at   INTEGER NOT NULL,   -- seconds since 1970-01-01 UTC
-        asset       TEXT,               -- identifier of the asset; NULL: the ticket is delivered inline
-        ticket      BLOB NOT NULL,
-        PRIMARY KEY (environment, name)
-    );
-    CREATE INDEX record_by_asset ON record (asset) WHERE asset IS NOT NULL;
-    CREATE TABLE hash (
-        environment TEXT NOT NULL,
-        name        TEXT NOT NULL,
-        position    INTEGER NOT NULL,
-        algorithm   INTEGER NOT NULL,
-        hash        BLOB NOT NULL,
-        PRIMARY KEY (environment, name, position),
-        FOREIGN KEY (environment, name) REFERENCES record (environment, name) ON DELETE CASCADE
-    );
-)";
-
-int exitStatusFor(int sqliteCode) {
-    switch (sqliteCode & 0xFF) {
-        case SQLITE_BUSY:
-        case SQLITE_LOCKED:
-            return EX_TEMPFAIL;
-        case SQLITE_CANTOPEN:
-            return EX_NOINPUT;
-        case SQLITE_CORRUPT:
-        case SQLITE_NOTADB:
-            return EX_DATAERR;
-        case SQLITE_PERM:
-        case SQLITE_READONLY:
-            return EX_NOPERM;
-        default:
-            return EX_IOERR;
+Action actionOf(const Record& record, std::optional<bool> revokedBefore, const Occasion& occasion) {
+    if (record.revoked) return Action::revoked;
+    if (!revokedBefore) return Action::issued;
+    if (!*revokedBefore) return Action::reissued;
+    if (!occasion.reinstates) {
+        throw Failure(
+            EX_DATAERR,
+            foundation::format("record %@ (%@) is revoked; nothing was issued. To make it valid again: "
+                               "--reinstate --comment TEXT",
+                               record.name, record.label));
     }
+    return Action::reinstated;
 }
 
-/// Runs database work; what the library throws becomes a Failure.
-template <class Work>
-auto guarded(Work&& work) {
-    try {
-        return std::forward<Work>(work)();
-    } catch (const SQLite::Exception& error) {
-        throw Failure(exitStatusFor(error.getErrorCode()), format("record store: %s", error.what()));
-    }
-}
-
-std::string environmentText(Environment environment) {
-    return std::string(toString(environment));
-}
-
-Data toData(const SQLite::Column& column) {
-    const auto* bytes = static_cast<const std::byte*>(column.getBlob());
-    const ByteView view(bytes, bytes == nullptr ? 0 : static_cast<std::size_t>(column.getBytes()));
-    return foundation::toData(view);
-}
-
-void bindBlob(SQLite::Statement& statement, int index, ByteView bytes) {
-    if (bytes.size() > static_cast<std::size_t>(std::numeric_limits<int>::max())) {
-        throw Failure(EX_DATAERR, "a ticket too large for the record store");
-    }
-    statement.bind(index, static_cast<const void*>(bytes.data()), static_cast<int>(bytes.size()));
-}
-
-void configure(SQLite::Database& database) {
-    database.exec("PRAGMA foreign_keys = ON");
-    database.exec("PRAGMA synchronous = FULL");
-}
-
-void deleteRecord(SQLite::Database& database, Environment environment, const std::string& name) {
-    SQLite::Statement statement(database, "DELETE FROM record WHERE environment = ? AND name = ?");
-    statement.bind(1, environmentText(environment));
-    statement.bind(2, name);
-    statement.exec();
-}
-
-void insertRecord(SQLite::Database& database, Environment environment, const SignedRecord& entry) {
-    const Record& record = entry.record;
-    SQLite::Statement statement(
-        database,
-        "INSERT INTO record (environment, name, label, revoked, signed_at, asset, ticket)"
-        " VALUES (?, ?, ?, ?, ?, ?, ?)");
-    statement.bind(1, environmentText(environment));
-    statement.bind(2, record.name);
-    statement.bind(3, record.label);
-    statement.bind(4, record.revoked ? 1 : 0);
-    statement.bind(5, record.signedAt.seconds);
-    if (record.asAsset) statement.bind(6, foundation::toHex(sha256(entry.ticket)));
-    bindBlob(statement, 7, entry.ticket);
-    statement.exec();
-}
-
-void insertHashes(SQLite::Database& database, Environment environment, const Record& record) {
-    SQLite::Statement statement(
-        database, "INSERT INTO hash (environment, name, position, algorithm, hash) VALUES (?, ?, ?, ?, ?)");
-    std::int64_t position = 0;
-    for (const CodeHash& hash : record.hashes) {
-        statement.reset();
-        statement.bind(1, environmentText(environment));
-        statement.bind(2, record.name);
-        statement.bind(3, position++);
-        statement.bind(4, hash.algorithm);
-        bindBlob(statement, 5, hash.hash);
-        statement.exec();
-    }
-}
-
-constexpr const char* kRecordColumns =
-    "SELECT name, label, revoked, signed_at, asset IS NOT NULL FROM record ";
-
-Record readRecord(SQLite::Database& database, Environment environment, SQLite::Statement& row) {
-    Record record;
-    record.name = row.getColumn(0).getString();
-    record.label = row.getColumn(1).getString();
-    record.revoked = row.getColumn(2).getInt() != 0;
-    record.signedAt = Date{row.getColumn(3).getInt64()};
-    record.asAsset = row.getColumn(4).getInt() != 0;
-
-    SQLite::Statement hashes(
-        database, "SELECT algorithm, hash FROM hash WHERE environment = ? AND name = ? ORDER BY position");
-    hashes.bind(1, environmentText(environment));
-    hashes.bind(2, record.name);
-    while (hashes.executeStep()) {
-        record.hashes.push_back({hashes.getColumn(0).getUInt(), toData(hashes.getColumn(1))});
-    }
-    return record;
-}
-
-}  // namespace
-
-std::string_view toString(Environment environment) {
-    return environment == Environment::production ? "production" : "development";
-}
-
-std::optional<Environment> parseEnvironment(std::string_view text) {
-    if (text == toString(Environment::production)) return Environment::production;
-    if (text == toString(Environment::development)) return Environment::development;
-    return std::nullopt;
-}
-
-void RecordStore::create(const std::string& path) {
-    writeNewFile(path, {}, 0600);  // SQLite gives the files that it adds the mode of this one
-    guarded([&] {
-        SQLite::Database database(path, SQLite::OPEN_READWRITE, kBusyTimeoutMilliseconds);
-        configure(database);
-        database.exec("PRAGMA journal_mode = WAL");
-        SQLite::Transaction transaction(database);
-        database.exec(kSchema);
-        database.exec("PRAGMA user_version = " + std::to_string(kSchemaVersion));
-        transaction.commit();
-    });
-}
-
-RecordStore::RecordStore(const std::string& path) {
-    guarded([&] {
-        database_ =
-            std::make_unique<SQLite::Database>(path, SQLite::OPEN_READWRITE, kBusyTimeoutMilliseconds);
-        configure(*database_);
-        const int version = database_->execAndGet("PRAGMA user_version").getInt();
-        if (version != kSchemaVersion) {
-            throw Failure(EX_DATAERR,
-                          format("%@: record store of version %d, not %d", path, version, kSchemaVersion));
-        }
-    });
-}
-
-RecordStore::~RecordStore() = default;
-
-std::optional<Delivery> RecordStore::findTicket(Environment environment, const std::string& recordName) {
-    const std::lock_guard lock(mutex_);
-    return guarded([&]() -> std::optional<Delivery> {
-        // An asset's bytes are left where they are: the answer needs their number alone.
-        SQLite::Statement row(*database_,
-                              "SELECT asset, length(ticket), CASE WHEN asset IS NULL THEN ticket END"
-                              " FROM record WHERE environment = ? AND name = ?");
-        row.bind(1, environmentText(environment));
-        row.bind(2, recordName);
-        if (!row.executeStep()) return std::nullopt;
-        Delivery delivery;
-        if (row.getColumn(0).isNull()) {
-            delivery.inlineTicket = toData(row.getColumn(2));
-        } else {
-            delivery.asset = Delivery::Asset{row.getColumn(0).getString(),
-                                             static_cast<std::uint64_t>(row.getColumn(1).getInt64())};
-        }
-        return delivery;
-    });
-}
-
-std::optional<Data> RecordStore::findAsset(const std::string& identifier) {
-    const std::lock_guard lock(mutex_);
-    return guarded([&]() -> std::optional<Data> {
-        SQLite::Statement row(*database_, "SELECT ticket FROM record WHERE asset = ? LIMIT 1");
-        row.bind(1, identifier);
-        if (!row.executeStep()) return std::nullopt;
-        return toData(row.getColumn(0));
-    });
-}
-
-std::size_t RecordStore::countRecords() {
-    const std::lock_guard lock(mutex_);
-    return guarded([&] {
-        return static_cast<std::size_t>(database_->execAndGet("SELECT count(*) FROM record").getInt64());
-    });
-}
-
-void RecordStore::put(Environment environment, const std::vector<SignedRecord>& records) {
-    const std::lock_guard lock(mutex_);
-    guarded([&] {
-        // Immediate: a transaction that starts by reading could not be upgraded behind another writer.
-        SQLite::Transaction transaction(*database_, SQLite::TransactionBehavior::IMMEDIATE);
-        for (const SignedRecord& entry : records) {
-            deleteRecord(*database_, environment, entry.record.name);
-            insertRecord(*database_, environment, entry);
-            insertHashes(*database_, environment, entry.record);
-        }
-        transaction.commit();
-    });
-}
-
-std::optional<Record> RecordStore::find(Environment environment, const std::string& recordName) {
-    const std::lock_guard lock(mutex_);
-    return guarded([&]() -> std::optional<Record> {
-        SQLite::Statement row(*database_, std::string(kRecordColumns) + "WHERE environment = ? AND name = ?");
-        row.bind(1, environmentText(environment));
-        row.bind(2, recordName);
-        if (!row.executeStep()) return std::nullopt;
-        return readRecord(*database_, environment, row);
-    });
-}
-
-std::vector<Record> RecordStore::list(Environment environment) {
-    const std::lock_guard lock(mutex_);
-    return guarded([&] {
-        SQLite::Statement row(*database_,
-                              std::string(kRecordColumns) + "WHERE environment = ? ORDER BY name");
-        row.bind(1, environmentText(environment));
-        std::vector<Record> records;
-        while (row.executeStep()) records.push_back(readRecord(*database_, environment, row));
-        return records;
-    });
+Event makeEvent(Environment environment, const SignedRecord& entry, Action action, const Occasion& occasion,
+                std::string previous) {
+    Event event;
+    event.time = occasion.time;
+    event.actor = occasion.actor;
+    event.action = action;
+    event.environment = environment;
+    event.record = entry.record.name;
+    event.label = entry.record.label;
+    if (action == Action::revoked) event.reason = occasion.reason.value_or(Reason::unspecified);
+    event.comment = occasion.comment;
+    event.ticket = foundation::toHex(sha256(entry.ticket));
+    event.previous = std::move(previous);
+    event.hash = hashOf(event);
+    return event;
 }
 
 }  // namespace pinwell::lumora

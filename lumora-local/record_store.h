@@ -1,32 +1,21 @@
-// The records of a service, in one SQLite database.
+// The records of a service and the log of what was done to them. One interface; a database behind it.
 //
-// Several processes use a store at once: one serves from it while others issue and revoke. The database is in
-// WAL mode, so readers never wait; a writer waits for another one for a few seconds before it fails
-// (EX_TEMPFAIL).
+// Several processes use a store at once: some serve from it while others issue and revoke.
 #pragma once
 
-#include <memory>
-#include <mutex>
+#include <cstdint>
+#include <functional>
 #include <optional>
 #include <string>
-#include <string_view>
 #include <vector>
 
 #include "foundation/bytes.h"
 #include "foundation/date.h"
 #include "lumora-local/code_hash.h"
-
-namespace SQLite {
-class Database;
-}
+#include "lumora-local/environment.h"
+#include "lumora-local/event.h"
 
 namespace pinwell::lumora {
-
-/// The two sets of records that a service keeps apart.
-enum class Environment { production, development };
-
-std::string_view toString(Environment environment);
-std::optional<Environment> parseEnvironment(std::string_view text);
 
 /// A ticket as lookups deliver it: inline, or by reference to an asset.
 struct Delivery {
@@ -46,14 +35,14 @@ class RecordSource {
 
     virtual std::optional<Delivery> findTicket(Environment environment, const std::string& recordName) = 0;
 
-    /// The ticket behind an asset identifier. A record that is replaced takes its asset along, so that a
-    /// revoked record's earlier ticket cannot be had any more.
+    /// The ticket behind an asset identifier. A record that is replaced takes its asset along, so a revoked
+    /// record's earlier ticket is no longer delivered.
     virtual std::optional<foundation::Data> findAsset(const std::string& identifier) = 0;
 
     virtual std::size_t countRecords() = 0;
 };
 
-/// One record with all that is known of it but the ticket.
+/// One record with all that is known of it except the ticket.
 struct Record {
     std::string name;
     std::string label;             // what was issued, for people: the artefact's file name
@@ -68,31 +57,66 @@ struct SignedRecord {
     foundation::Data ticket;
 };
 
-class RecordStore final : public RecordSource {
+/// Who changes records, when and why. Becomes part of each event.
+struct Occasion {
+    foundation::Date time;
+    std::string actor;
+    std::optional<Reason> reason;  // of a revocation
+    std::string comment;
+    bool reinstates = false;  // a valid ticket may take the place of a revoked one
+};
+
+/// A record beside the last event about it, for checks.
+struct RecordState {
+    Environment environment = Environment::production;
+    std::string name;
+    std::string ticket;  // SHA-256 of the ticket in hexadecimal
+    bool revoked = false;
+    std::optional<std::string> lastTicket;  // what the last event says; `nullopt` if there is no event
+    std::optional<Action> lastAction;
+};
+
+/// Hears of every event, oldest first, and then of every record. An exception ends the walk.
+struct HistoryVisitor {
+    std::function<void(const Event&)> event;
+    std::function<void(const RecordState&)> record;
+};
+
+struct EventQuery {
+    std::optional<std::string> record;
+    std::optional<foundation::Date> since;  // events of this second and later
+};
+
+/// Calls may come from any thread, several at a time. They throw Failure.
+class RecordStore : public RecordSource {
   public:
-    /// Makes an empty store, readable by its owner alone, where nothing must stand yet. Throws Failure.
-    static void create(const std::string& path);
+    /// Puts all records into the store, each in the place of an earlier record of its name, and appends an
+    /// event for each, in one transaction; or changes nothing. A valid ticket for a revoked record is refused
+    /// (EX_DATAERR), unless the occasion reinstates. When this returns, the change survives a crash.
+    virtual void put(Environment environment, const std::vector<SignedRecord>& records,
+                     const Occasion& occasion) = 0;
 
-    /// Opens an existing one. Throws Failure.
-    explicit RecordStore(const std::string& path);
-    ~RecordStore() override;
-
-    std::optional<Delivery> findTicket(Environment environment, const std::string& recordName) override;
-    std::optional<foundation::Data> findAsset(const std::string& identifier) override;
-    std::size_t countRecords() override;
-
-    /// Puts all of them into the store, each in the place of an earlier record of its name, or none
-    /// (Failure).
-    void put(Environment environment, const std::vector<SignedRecord>& records);
-
-    std::optional<Record> find(Environment environment, const std::string& recordName);
+    virtual std::optional<Record> find(Environment environment, const std::string& recordName) = 0;
 
     /// In the order of their names.
-    std::vector<Record> list(Environment environment);
+    virtual std::vector<Record> list(Environment environment) = 0;
 
-  private:
-    std::mutex mutex_;  // a connection's statements are not to be mixed
-    std::unique_ptr<SQLite::Database> database_;
+    /// Every event that the query selects, oldest first. Memory does not grow with their number.
+    virtual void forEachEvent(const EventQuery& query, const std::function<void(const Event&)>& visit) = 0;
+
+    /// All events and all records as of one point in time.
+    virtual void walkHistory(const HistoryVisitor& visitor) = 0;
+
+    /// The hash of the last event; hashBeforeTheFirstEvent() if there is none.
+    virtual std::string headHash() = 0;
 };
+
+/// What putting `record` does to a record of its name that is there already. Throws Failure (EX_DATAERR) if
+/// that would make a revoked record valid and the occasion does not reinstate.
+Action actionOf(const Record& record, std::optional<bool> revokedBefore, const Occasion& occasion);
+
+/// The event for a put, with its hash.
+Event makeEvent(Environment environment, const SignedRecord& entry, Action action, const Occasion& occasion,
+                std::string previous);
 
 }  // namespace pinwell::lumora

@@ -10,8 +10,8 @@
 #include "foundation/format.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
-#include "lumora-local/record_store.h"
 #include "lumora-local/server.h"
+#include "lumora-local/sqlite_store.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -61,7 +61,7 @@ void serve(const ServiceDirectory& directory, const ServeOptions& options, const
     // A file that an earlier run left would tell of a service that is not there yet.
     if (options.readyFile) ::unlink(options.readyFile->c_str());
     const TlsContext tls(directory.serverCertificatePath(), directory.serverKeyPath());
-    RecordStore store(directory.storePath());
+    SqliteStore store(directory.storePath());
     Listener listener(options.listen ? *options.listen : directory.advertisedEndpoint());
     const Endpoint endpoint = reachable(directory, listener.endpoint());
     announce(directory, options, output, endpoint);

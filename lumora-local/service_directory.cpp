@@ -7,7 +7,7 @@
 #include "lumora-local/authority.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
-#include "lumora-local/record_store.h"
+#include "lumora-local/sqlite_store.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -72,7 +72,7 @@ void buildService(const std::string& directory, const Authority& authority,
     writeIdentity(directory, "server", authority.server);
     const Value description = Dictionary{{std::string(kHostsKey), Value(Array(hosts.begin(), hosts.end()))}};
     writeNewFile(directory + "/service.json", jsonDocument(description), kPublicFileMode);
-    RecordStore::create(directory + "/records.sqlite");
+    SqliteStore::create(directory + "/records.sqlite");
     flushDirectory(directory);
 }
 

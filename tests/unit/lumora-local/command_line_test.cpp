@@ -4,6 +4,7 @@
 
 #include "foundation/json.h"
 #include "running_service.h"
+#include "support/environment.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -43,6 +44,13 @@ TEST_F(CommandLine, RefusesWhatItDoesNotUnderstand) {
                                                       {"init"},
                                                       {"init", service_, "--color"},
                                                       {"issue", service_},
+                                                      {"revoke", service_},
+                                                      {"issue", service_, "a", "--reinstate"},
+                                                      {"issue", service_, "a", "--label", "b"},
+                                                      {"revoke", service_, "a", "--reason", "boredom"},
+                                                      {"log", service_, "--since", "yesterday"},
+                                                      {"log", service_, "--head", std::string(64, '0')},
+                                                      {"log", service_, "--verify", "--head", "abc"},
                                                       {"init", service_, "--port", "0"},
                                                       {"init", service_, "--port", "65536"},
                                                       {"init", service_, "--port", "x"},
@@ -69,6 +77,64 @@ TEST_F(CommandLine, MakesAServiceOnce) {
     EXPECT_EQ(readFile(service_ + "/platform/platform.json"),
               "{\"lumora\":{\"host\":\"tickets.example:99\"}}\n");
     expectFailure(runProgram({"init", service_}), 73);
+}
+
+/// A service with one record, which a test can issue and revoke without an artefact.
+class RecordCommands : public CommandLine {
+  protected:
+    RecordCommands() { EXPECT_EQ(runProgram({"init", service_}).exitStatus, 0); }
+
+    Outcome issueRecord(std::vector<std::string> options = {}) {
+        options.insert(options.begin(), {"issue", service_, "--record", record_, "--label", "huge.dmg"});
+        return runProgram(options);
+    }
+
+    const std::string record_ = "2/2/00112233445566778899aabbccddeeff00112233";
+};
+
+TEST_F(RecordCommands, IssueForAnArtefactThatIsNotHere) {
+    const Outcome issued = issueRecord({"--json"});
+    ASSERT_EQ(issued.exitStatus, 0) << issued.err;
+    const auto document = foundation::parseJSON(foundation::asBytes(issued.out));
+    ASSERT_TRUE(document) << issued.out;
+    EXPECT_EQ(*(*document)["records"][0]["recordName"].string(), record_);
+    EXPECT_EQ(*(*document)["records"][0]["label"].string(), "huge.dmg");
+}
+
+TEST_F(RecordCommands, DoNotMakeRevokedSoftwareValidAgainUnasked) {
+    issueRecord();
+    EXPECT_EQ(runProgram({"revoke", service_, record_, "--reason", "compromised"}).exitStatus, 0);
+    const Outcome refused = issueRecord();
+    expectFailure(refused, 65);
+    EXPECT_NE(refused.err.find(record_), std::string::npos) << refused.err;
+    EXPECT_TRUE(runProgram({"list", service_}).out.starts_with("revoked\t"));
+    EXPECT_EQ(issueRecord({"--reinstate", "--comment", "a false alarm"}).exitStatus, 0);
+    EXPECT_TRUE(runProgram({"list", service_}).out.starts_with("valid\t"));
+}
+
+TEST_F(RecordCommands, AreLogged) {
+    issueRecord();
+    runProgram({"revoke", service_, record_, "--reason", "compromised", "--comment", "key lost"});
+    const Outcome log = runProgram({"log", service_});
+    EXPECT_NE(log.out.find("\tissued\t" + record_), std::string::npos) << log.out;
+    EXPECT_NE(log.out.find("\tcompromised\tkey lost\n"), std::string::npos) << log.out;
+    const Outcome head = runProgram({"log", "--head", service_});
+    EXPECT_EQ(head.out.size(), 65U) << head.out;
+    const std::string hash = head.out.substr(0, 64);
+    EXPECT_EQ(runProgram({"log", service_, "--verify", "--head", hash}).exitStatus, 0);
+    const Outcome other = runProgram({"log", service_, "--verify", "--head", std::string(64, 'a')});
+    expectFailure(other, 78);
+    EXPECT_EQ(runProgram({"log", service_, "--since", "2100-01-01"}).out, "");
+    EXPECT_EQ(runProgram({"log", service_, "--record", "2/2/other", "--json"}).out, "{\"events\":[]}\n");
+}
+
+TEST_F(RecordCommands, FindTheServiceInTheEnvironment) {
+    const pinwell::test::ScopedVariable directory("LUMORA_DIR", service_);
+    EXPECT_EQ(runProgram({"issue", "--record", record_}).exitStatus, 0);
+    EXPECT_EQ(runProgram({"revoke", record_}).exitStatus, 0);
+    EXPECT_TRUE(runProgram({"list"}).out.starts_with("revoked\t"));
+    EXPECT_TRUE(runProgram({"list", service_}).out.starts_with("revoked\t"));
+    EXPECT_EQ(runProgram({"revoke", service_, record_}).exitStatus, 0);
 }
 
 TEST_F(CommandLine, NeedsAServiceToWorkOn) {

@@ -8,6 +8,7 @@
 #include "foundation/json.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/service_directory.h"
+#include "lumora-local/sqlite_store.h"
 #include "support/temporary_directory.h"
 
 namespace pinwell::lumora {
@@ -36,6 +37,19 @@ CodeHash hashOf(std::uint32_t algorithm, int fill) {
 
 Artefact artefact(std::string label, const CodeHash& own, const std::vector<CodeHash>& others = {}) {
     return {std::move(label), own, hashesForTicket(own, others)};
+}
+
+IssueRequest artefacts(std::vector<std::string> paths, bool asAsset = false) {
+    IssueRequest request;
+    request.paths = std::move(paths);
+    request.asAsset = asAsset;
+    return request;
+}
+
+RevokeRequest subjects(std::vector<std::string> subjects) {
+    RevokeRequest request;
+    request.subjects = std::move(subjects);
+    return request;
 }
 
 class CommandsTest : public testing::Test {
@@ -69,17 +83,17 @@ class CommandsTest : public testing::Test {
 
     const TemporaryDirectory directory_;
     const ServiceDirectory service_ = ServiceDirectory::create(directory_ / "service", {}, Date::now());
-    RecordStore store_{service_.storePath()};
+    SqliteStore store_{service_.storePath()};
     const TicketSigner signer_{service_.signerKeyPath(), service_.signerChainPaths()};
     FakeHasher hasher_;
-    const Registry registry_{store_, signer_, hasher_, Environment::production,
-                             [] { return Date{1'795'000'000}; }};
+    const Registry registry_{
+        store_, signer_, hasher_, Environment::production, "tester", [] { return Date{1'795'000'000}; }};
     const std::string nameOfA_ = recordName(hashOf(2, 0xA1));
     const std::string nameOfB_ = recordName(hashOf(2, 0xB1));
 };
 
 TEST_F(CommandsTest, IssuesARecordUnderTheArtefactsOwnHash) {
-    const auto records = issue(registry_, {"A.app"}, false);
+    const auto records = issue(registry_, artefacts({"A.app"}));
     ASSERT_EQ(records.size(), 1U);
     EXPECT_EQ(records[0].name, nameOfA_);
     EXPECT_EQ(records[0].label, "A.app");
@@ -90,7 +104,7 @@ TEST_F(CommandsTest, IssuesARecordUnderTheArtefactsOwnHash) {
 }
 
 TEST_F(CommandsTest, DeliversAsAnAssetOnRequest) {
-    EXPECT_TRUE(issue(registry_, {"A.app"}, true)[0].asAsset);
+    EXPECT_TRUE(issue(registry_, artefacts({"A.app"}, true))[0].asAsset);
     EXPECT_TRUE(store_.findTicket(Environment::production, nameOfA_)->asset);
 }
 
@@ -103,24 +117,24 @@ TEST_F(CommandsTest, DeliversLargeTicketsAsAssetsUnasked) {
         many.push_back(hash);
     }
     hasher_.artefacts["large"] = {"large", many.front(), many};
-    EXPECT_TRUE(issue(registry_, {"large"}, false)[0].asAsset);
+    EXPECT_TRUE(issue(registry_, artefacts({"large"}))[0].asAsset);
 }
 
 TEST_F(CommandsTest, IssuesAllOrNone) {
-    EXPECT_EQ(exitStatusOf([&] { issue(registry_, {"A.app", "missing"}, false); }), EX_NOINPUT);
+    EXPECT_EQ(exitStatusOf([&] { issue(registry_, artefacts({"A.app", "missing"})); }), EX_NOINPUT);
     EXPECT_EQ(store_.countRecords(), 0U);
 }
 
 TEST_F(CommandsTest, IssuesInAnEnvironment) {
-    const Registry development{store_, signer_, hasher_, Environment::development, Date::now};
-    issue(development, {"A.app"}, false);
+    const Registry development{store_, signer_, hasher_, Environment::development, "tester", Date::now};
+    issue(development, artefacts({"A.app"}));
     EXPECT_FALSE(store_.find(Environment::production, nameOfA_));
     EXPECT_TRUE(store_.find(Environment::development, nameOfA_));
 }
 
 TEST_F(CommandsTest, RevokesByNameAndByPath) {
-    issue(registry_, {"A.app", "b.dmg"}, false);
-    const auto records = revoke(registry_, {nameOfA_, "b.dmg"});
+    issue(registry_, artefacts({"A.app", "b.dmg"}));
+    const auto records = revoke(registry_, subjects({nameOfA_, "b.dmg"}));
     ASSERT_EQ(records.size(), 2U);
     EXPECT_TRUE(records[0].revoked && records[1].revoked);
     EXPECT_EQ(deliveredFlags(nameOfA_), 1U);
@@ -128,31 +142,71 @@ TEST_F(CommandsTest, RevokesByNameAndByPath) {
 }
 
 TEST_F(CommandsTest, KeepsTheDeliveryAndTheHashesOfARevokedRecord) {
-    issue(registry_, {"A.app"}, true);
-    const auto records = revoke(registry_, {nameOfA_});
+    issue(registry_, artefacts({"A.app"}, true));
+    const auto records = revoke(registry_, subjects({nameOfA_}));
     EXPECT_TRUE(records[0].asAsset);
     EXPECT_EQ(records[0].hashes.size(), 2U);
     EXPECT_EQ(deliveredFlags(nameOfA_), 1U);
 }
 
 TEST_F(CommandsTest, RevokesAllOrNone) {
-    issue(registry_, {"A.app"}, false);
-    EXPECT_EQ(exitStatusOf([&] { revoke(registry_, {nameOfA_, "b.dmg"}); }), EX_DATAERR);
-    EXPECT_EQ(exitStatusOf([&] { revoke(registry_, {nameOfA_, nameOfB_}); }), EX_DATAERR);
-    EXPECT_EQ(exitStatusOf([&] { revoke(registry_, {nameOfA_, "missing"}); }), EX_NOINPUT);
+    issue(registry_, artefacts({"A.app"}));
+    EXPECT_EQ(exitStatusOf([&] { revoke(registry_, subjects({nameOfA_, "b.dmg"})); }), EX_DATAERR);
+    EXPECT_EQ(exitStatusOf([&] { revoke(registry_, subjects({nameOfA_, nameOfB_})); }), EX_DATAERR);
+    EXPECT_EQ(exitStatusOf([&] { revoke(registry_, subjects({nameOfA_, "missing"})); }), EX_NOINPUT);
     EXPECT_EQ(deliveredFlags(nameOfA_), 0U);
 }
 
-TEST_F(CommandsTest, ReissuesARevokedArtefact) {
-    issue(registry_, {"A.app"}, false);
-    revoke(registry_, {"A.app"});
-    EXPECT_FALSE(issue(registry_, {"A.app"}, false)[0].revoked);
+TEST_F(CommandsTest, DoesNotReissueARevokedArtefact) {
+    issue(registry_, artefacts({"A.app"}));
+    revoke(registry_, subjects({"A.app"}));
+    EXPECT_EQ(exitStatusOf([&] { issue(registry_, artefacts({"b.dmg", "A.app"})); }), EX_DATAERR);
+    EXPECT_EQ(deliveredFlags(nameOfA_), 1U);
+    EXPECT_FALSE(store_.find(Environment::production, nameOfB_));
+}
+
+TEST_F(CommandsTest, ReinstatesARevokedArtefactOnRequest) {
+    issue(registry_, artefacts({"A.app"}));
+    revoke(registry_, subjects({"A.app"}));
+    IssueRequest request = artefacts({"A.app"});
+    request.reinstates = true;
+    request.comment = "a false alarm";
+    EXPECT_FALSE(issue(registry_, request)[0].revoked);
     EXPECT_EQ(deliveredFlags(nameOfA_), 0U);
+}
+
+TEST_F(CommandsTest, IssuesForARecordWithoutItsArtefact) {
+    IssueRequest request;
+    request.recordNames = {nameOfB_};
+    request.label = "huge.dmg";
+    const auto records = issue(registry_, request);
+    ASSERT_EQ(records.size(), 1U);
+    EXPECT_EQ(records[0].label, "huge.dmg");
+    EXPECT_EQ(records[0].hashes, (std::vector<CodeHash>{hashOf(2, 0xB1)}));
+    EXPECT_EQ(deliveredFlags(nameOfB_), 0U);
+}
+
+TEST_F(CommandsTest, RefusesARecordNameThatIsNone) {
+    IssueRequest request;
+    request.recordNames = {"2/2/AB"};
+    EXPECT_EQ(exitStatusOf([&] { issue(registry_, request); }), EX_USAGE);
+}
+
+TEST_F(CommandsTest, LogsWhoRevokedAndWhy) {
+    issue(registry_, artefacts({"A.app"}));
+    revoke(registry_, {{"A.app"}, Reason::superseded, "2.0 is out"});
+    std::vector<Event> events;
+    store_.forEachEvent({}, [&](const Event& event) { events.push_back(event); });
+    ASSERT_EQ(events.size(), 2U);
+    EXPECT_EQ(events[1].actor, "tester");
+    EXPECT_EQ(events[1].reason, Reason::superseded);
+    EXPECT_EQ(events[1].comment, "2.0 is out");
+    EXPECT_EQ(events[1].time, Date{1'795'000'000});
 }
 
 TEST_F(CommandsTest, ListsARecordOnALine) {
-    issue(registry_, {"A.app", "b.dmg"}, false);
-    revoke(registry_, {"b.dmg"});
+    issue(registry_, artefacts({"A.app", "b.dmg"}));
+    revoke(registry_, subjects({"b.dmg"}));
     EXPECT_EQ(describeRecords(store_.list(Environment::production)),
               "valid\t" + nameOfA_ + "\tinline\t2026-11-18 11:06:40 +0000\t2\tA.app\n" + "revoked\t" +
                   nameOfB_ + "\tinline\t2026-11-18 11:06:40 +0000\t1\tb.dmg\n");
@@ -160,7 +214,7 @@ TEST_F(CommandsTest, ListsARecordOnALine) {
 
 TEST_F(CommandsTest, ListsForPrograms) {
     hasher_.artefacts["odd"] = artefact("odd\n\xFF.app", hashOf(4, 3));
-    issue(registry_, {"odd"}, true);
+    issue(registry_, artefacts({"odd"}, true));
     const std::string text = recordsAsJson(store_.list(Environment::production));
     const auto document = foundation::parseJSON(foundation::asBytes(text));
     ASSERT_TRUE(document) << text;

@@ -17,6 +17,7 @@
 #include <stdexcept>
 
 #include "foundation/file_io.h"
+#include "lumora-local/sqlite_store.h"
 #include "lumora-local/ticket_maker.h"
 
 extern char** environ;
@@ -106,7 +107,8 @@ std::string RunningService::put(const CodeHash& hash, bool asAsset, bool revoked
     const TicketSigner signer(directory_.signerKeyPath(), directory_.signerChainPaths());
     SignedRecord record{{recordName(hash), "made up", {hash}, revoked, asAsset, Date::now()}, {}};
     record.ticket = signer.makeTicket({record.record.hashes, revoked, record.record.signedAt});
-    RecordStore(directory_.storePath()).put(Environment::production, {record});
+    SqliteStore(directory_.storePath())
+        .put(Environment::production, {record}, {foundation::Date::now(), "tester", std::nullopt, "", false});
     return record.record.name;
 }
 

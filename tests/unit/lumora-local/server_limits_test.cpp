@@ -10,6 +10,7 @@
 #include <thread>
 
 #include "lumora-local/server.h"
+#include "lumora-local/sqlite_store.h"
 #include "running_service.h"
 
 namespace pinwell::lumora {
@@ -67,7 +68,7 @@ class LimitedServer {
   private:
     TemporaryDirectory temporary_;
     ServiceDirectory directory_ = ServiceDirectory::create(temporary_ / "service", {}, Date::now());
-    RecordStore store_{directory_.storePath()};
+    SqliteStore store_{directory_.storePath()};
     TlsContext tls_{directory_.serverCertificatePath(), directory_.serverKeyPath()};
     Listener listener_{Endpoint{"127.0.0.1", 0}};
     FileDescriptor stop_{::eventfd(0, EFD_CLOEXEC)};

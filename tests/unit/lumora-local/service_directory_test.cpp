@@ -8,7 +8,7 @@
 
 #include "certificates.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/record_store.h"
+#include "lumora-local/sqlite_store.h"
 #include "lumora-local/ticket_maker.h"
 #include "support/temporary_directory.h"
 
@@ -139,7 +139,7 @@ TEST_F(ServiceDirectoryTest, CanBeOpenedAndUsed) {
     create({{"localhost", "127.0.0.1"}, 1});
     const ServiceDirectory directory = ServiceDirectory::open(path_);
     EXPECT_EQ(directory.hosts(), (std::vector<std::string>{"localhost", "127.0.0.1"}));
-    EXPECT_EQ(RecordStore(directory.storePath()).countRecords(), 0U);
+    EXPECT_EQ(SqliteStore(directory.storePath()).countRecords(), 0U);
     const TicketSigner signer(directory.signerKeyPath(), directory.signerChainPaths());
     EXPECT_FALSE(signer.makeTicket({{{2, foundation::Data(20)}}, false, Date{1}}).empty());
 }

@@ -1,0 +1,126 @@
+#include "lumora-local/event.h"
+
+#include <array>
+#include <nlohmann/json.hpp>
+
+#include "foundation/bytes.h"
+#include "foundation/format.h"
+#include "lumora-local/rfc3339.h"
+#include "lumora-local/sha256.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::escapeForTerminal;
+using foundation::format;
+
+constexpr std::array kActions{Action::issued, Action::reissued, Action::revoked, Action::reinstated};
+constexpr std::array kReasons{Reason::compromised, Reason::superseded, Reason::withdrawn,
+                              Reason::unspecified};
+constexpr std::size_t kHashDigits = 64;
+
+std::string_view reasonText(const Event& event) {
+    return event.reason ? toString(*event.reason) : std::string_view();
+}
+
+void append(std::string& text, std::string_view field) {
+    text += std::to_string(field.size());
+    text += ':';
+    text += field;
+    text += ',';
+}
+
+nlohmann::ordered_json textOrNull(std::string_view text) {
+    return text.empty() ? nlohmann::ordered_json(nullptr) : nlohmann::ordered_json(escapeForTerminal(text));
+}
+
+}  // namespace
+
+std::string_view toString(Action action) {
+    switch (action) {
+        case Action::issued:
+            return "issued";
+        case Action::reissued:
+            return "reissued";
+        case Action::revoked:
+            return "revoked";
+        case Action::reinstated:
+            return "reinstated";
+    }
+    return "issued";
+}
+
+std::string_view toString(Reason reason) {
+    switch (reason) {
+        case Reason::compromised:
+            return "compromised";
+        case Reason::superseded:
+            return "superseded";
+        case Reason::withdrawn:
+            return "withdrawn";
+        case Reason::unspecified:
+            return "unspecified";
+    }
+    return "unspecified";
+}
+
+std::optional<Action> parseAction(std::string_view text) {
+    for (const Action action : kActions) {
+        if (text == toString(action)) return action;
+    }
+    return std::nullopt;
+}
+
+std::optional<Reason> parseReason(std::string_view text) {
+    for (const Reason reason : kReasons) {
+        if (text == toString(reason)) return reason;
+    }
+    return std::nullopt;
+}
+
+std::vector<std::string> reasonNames() {
+    std::vector<std::string> names;
+    for (const Reason reason : kReasons) names.emplace_back(toString(reason));
+    return names;
+}
+
+std::string hashBeforeTheFirstEvent() {
+    return std::string(kHashDigits, '0');
+}
+
+std::string hashOf(const Event& event) {
+    std::string text;
+    append(text, event.previous);
+    append(text, toRfc3339(event.time));
+    append(text, event.actor);
+    append(text, toString(event.action));
+    append(text, toString(event.environment));
+    append(text, event.record);
+    append(text, event.label);
+    append(text, reasonText(event));
+    append(text, event.comment);
+    append(text, event.ticket);
+    return foundation::toHex(sha256(foundation::asBytes(text)));
+}
+
+std::string describeEvent(const Event& event) {
+    return format("%s\t%s\t%@\t%@\t%@\t%s\t%@\n", toRfc3339(event.time), toString(event.action), event.record,
+                  event.actor, event.label, reasonText(event), event.comment);
+}
+
+std::string eventAsJson(const Event& event) {
+    nlohmann::ordered_json object{{"time", toRfc3339(event.time)},
+                                  {"actor", escapeForTerminal(event.actor)},
+                                  {"action", toString(event.action)},
+                                  {"record", event.record},
+                                  {"label", escapeForTerminal(event.label)},
+                                  {"reason", textOrNull(reasonText(event))},
+                                  {"comment", textOrNull(event.comment)},
+                                  {"ticket", event.ticket},
+                                  {"previous", event.previous},
+                                  {"hash", event.hash}};
+    if (event.environment != Environment::production) object["environment"] = toString(event.environment);
+    return object.dump(-1, ' ', false, nlohmann::ordered_json::error_handler_t::replace);
+}
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,72 @@
+// The log of a record service: what was done to which record, when, by whom and why.
+//
+// Events are never changed and never removed. Each carries the hash of the one before it, so that an event
+// that was altered, removed or put in between shows when the chain is walked. An event's hash is SHA-256 over
+// these fields, in this order, each as its length in decimal, a colon, its bytes and a comma:
+//
+//   previous     the previous event's hash, 64 lower-case hexadecimal digits; 64 zeros for the first event
+//   time         RFC 3339 in UTC, whole seconds: 2026-11-20T19:55:00Z
+//   actor        who did it: a login name, or the name in a client's certificate
+//   action       issued, reissued, revoked or reinstated
+//   environment  production or development
+//   record       the record's name
+//   label        what the record was issued for
+//   reason       compromised, superseded, withdrawn or unspecified for a revocation; else empty
+//   comment      free text; may be empty
+//   ticket       SHA-256 of the ticket that the record got, 64 lower-case hexadecimal digits
+#pragma once
+
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "foundation/date.h"
+#include "lumora-local/environment.h"
+
+namespace pinwell::lumora {
+
+/// What happened to a record.
+enum class Action { issued, reissued, revoked, reinstated };
+
+/// Why a record was revoked.
+enum class Reason { compromised, superseded, withdrawn, unspecified };
+
+std::string_view toString(Action action);
+std::string_view toString(Reason reason);
+
+/// `nullopt` for any other text.
+std::optional<Action> parseAction(std::string_view text);
+std::optional<Reason> parseReason(std::string_view text);
+
+/// All reasons' names, for usage texts.
+std::vector<std::string> reasonNames();
+
+struct Event {
+    foundation::Date time;
+    std::string actor;
+    Action action = Action::issued;
+    Environment environment = Environment::production;
+    std::string record;
+    std::string label;
+    std::optional<Reason> reason;  // of a revocation
+    std::string comment;
+    std::string ticket;    // SHA-256 in hexadecimal
+    std::string previous;  // hash of the previous event
+    std::string hash;
+};
+
+/// What stands before the first event: 64 zeros.
+std::string hashBeforeTheFirstEvent();
+
+/// The hash that an event with these fields has; `event.hash` plays no part. Throws Failure if the
+/// cryptographic library fails.
+std::string hashOf(const Event& event);
+
+/// For people: one line an event, tab-separated: time, action, record, actor, label, reason, comment.
+std::string describeEvent(const Event& event);
+
+/// For programs: one JSON object without a line end. `environment` is there if it is not production.
+std::string eventAsJson(const Event& event);
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,59 @@
+#include "lumora-local/sqlite_rows.h"
+
+#include <SQLiteCpp/SQLiteCpp.h>
+
+#include "foundation/format.h"
+#include "lumora-local/failure.h"
+
+namespace pinwell::lumora {
+namespace {
+
+template <class T>
+T known(const std::optional<T>& value, const char* column, const std::string& text) {
+    if (!value)
+        throw Failure(EX_CONFIG, foundation::format("record store: no %s is called %@", column, text));
+    return *value;
+}
+
+}  // namespace
+
+Event readEvent(const SQLite::Statement& row) {
+    const auto text = [&](int column) { return row.getColumn(column).getString(); };
+    Event event;
+    event.time = foundation::Date{row.getColumn(0).getInt64()};
+    event.actor = text(1);
+    event.action = known(parseAction(text(2)), "action", text(2));
+    event.environment = known(parseEnvironment(text(3)), "environment", text(3));
+    event.record = text(4);
+    event.label = text(5);
+    if (!row.getColumn(6).isNull()) event.reason = known(parseReason(text(6)), "reason", text(6));
+    event.comment = text(7);
+    event.ticket = text(8);
+    event.previous = text(9);
+    event.hash = text(10);
+    return event;
+}
+
+void insertEvent(SQLite::Database& database, const Event& event) {
+    SQLite::Statement statement(database, std::string("INSERT INTO event (") + kEventColumns +
+                                              ") VALUES (?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?)");
+    statement.bind(1, event.time.seconds);
+    statement.bind(2, event.actor);
+    statement.bind(3, std::string(toString(event.action)));
+    statement.bind(4, std::string(toString(event.environment)));
+    statement.bind(5, event.record);
+    statement.bind(6, event.label);
+    if (event.reason) statement.bind(7, std::string(toString(*event.reason)));
+    statement.bind(8, event.comment);
+    statement.bind(9, event.ticket);
+    statement.bind(10, event.previous);
+    statement.bind(11, event.hash);
+    statement.exec();
+}
+
+std::string lastEventHash(SQLite::Database& database) {
+    SQLite::Statement row(database, "SELECT hash FROM event ORDER BY position DESC LIMIT 1");
+    return row.executeStep() ? row.getColumn(0).getString() : hashBeforeTheFirstEvent();
+}
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,163 @@
+#include "lumora-local/sqlite_schema.h"
+
+#include <SQLiteCpp/SQLiteCpp.h>
+
+#include <filesystem>
+#include <system_error>
+
+#include "foundation/bytes.h"
+#include "foundation/format.h"
+#include "lumora-local/failure.h"
+#include "lumora-local/file_writing.h"
+#include "lumora-local/sha256.h"
+#include "lumora-local/sqlite_rows.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::format;
+
+constexpr int kCurrentVersion = 2;
+
+constexpr const char* kRecordTables = R"(
+    CREATE TABLE record (
+        environment TEXT NOT NULL,
+        name        TEXT NOT NULL,
+        label       TEXT NOT NULL,
+        revoked     INTEGER NOT NULL,
+        signed_at   INTEGER NOT NULL,   -- seconds since 1970-01-01 UTC
+        asset       TEXT,               -- identifier of the asset; NULL: the ticket is delivered inline
+        ticket      BLOB NOT NULL,
+        PRIMARY KEY (environment, name)
+    );
+    CREATE INDEX record_by_asset ON record (asset) WHERE asset IS NOT NULL;
+    CREATE TABLE hash (
+        environment TEXT NOT NULL,
+        name        TEXT NOT NULL,
+        position    INTEGER NOT NULL,
+        algorithm   INTEGER NOT NULL,
+        hash        BLOB NOT NULL,
+        PRIMARY KEY (environment, name, position),
+        FOREIGN KEY (environment, name) REFERENCES record (environment, name) ON DELETE CASCADE
+    );
+)";
+
+// Since version 2. The triggers stop mistakes; the chain of hashes shows intent.
+constexpr const char* kEventTable = R"(
+    CREATE TABLE event (
+        position    INTEGER PRIMARY KEY AUTOINCREMENT,
+        time        INTEGER NOT NULL,   -- seconds since 1970-01-01 UTC
+        actor       TEXT NOT NULL,
+        action      TEXT NOT NULL,
+        environment TEXT NOT NULL,
+        record      TEXT NOT NULL,
+        label       TEXT NOT NULL,
+        reason      TEXT,               -- of a revocation
+        comment     TEXT NOT NULL,
+        ticket      TEXT NOT NULL,      -- SHA-256 in hexadecimal
+        previous    TEXT NOT NULL UNIQUE,
+        hash        TEXT NOT NULL UNIQUE
+    );
+    CREATE INDEX event_by_record ON event (environment, record, position);
+    CREATE TRIGGER event_is_not_changed BEFORE UPDATE ON event
+        BEGIN SELECT RAISE(ABORT, 'events are never changed'); END;
+    CREATE TRIGGER event_is_not_removed BEFORE DELETE ON event
+        BEGIN SELECT RAISE(ABORT, 'events are never removed'); END;
+)";
+
+int versionOf(SQLite::Database& database) {
+    return database.execAndGet("PRAGMA user_version").getInt();
+}
+
+void setVersion(SQLite::Database& database) {
+    database.exec("PRAGMA user_version = " + std::to_string(kCurrentVersion));
+}
+
+/// A name beside `path` that nothing has.
+std::string freeCopyName(const std::string& path, int version) {
+    const std::string first = path + ".version-" + std::to_string(version);
+    std::string name = first;
+    std::error_code ignored;
+    for (int attempt = 2; std::filesystem::exists(std::filesystem::symlink_status(name, ignored));
+         ++attempt) {
+        name = first + "." + std::to_string(attempt);
+    }
+    return name;
+}
+
+/// A copy as of the last commit, through a connection of its own: the caller's transaction goes on meanwhile.
+void keepCopy(const std::string& path, int version) {
+    const std::string copy = freeCopyName(path, version);
+    writeNewFile(copy, {}, 0600);
+    try {
+        SQLite::Database reader(path, SQLite::OPEN_READWRITE, kBusyTimeoutMilliseconds);
+        SQLite::Statement statement(reader, "VACUUM INTO ?");
+        statement.bind(1, copy);
+        statement.exec();
+    } catch (...) {
+        std::error_code ignored;
+        std::filesystem::remove(copy, ignored);
+        throw;
+    }
+    flushDirectory(std::filesystem::path(copy).parent_path().string());
+}
+
+/// The first events of a store that had none: its records as they are.
+void logExistingRecords(SQLite::Database& database) {
+    SQLite::Statement row(database,
+                          "SELECT environment, name, label, revoked, signed_at, ticket FROM record"
+                          " ORDER BY signed_at, environment, name");
+    std::string previous = hashBeforeTheFirstEvent();
+    while (row.executeStep()) {
+        Event event;
+        event.environment = parseEnvironment(row.getColumn(0).getString()).value_or(Environment::production);
+        event.record = row.getColumn(1).getString();
+        event.label = row.getColumn(2).getString();
+        event.action = row.getColumn(3).getInt() != 0 ? Action::revoked : Action::issued;
+        if (event.action == Action::revoked) event.reason = Reason::unspecified;
+        event.time = foundation::Date{row.getColumn(4).getInt64()};
+        event.actor = "lumora-local";
+        event.comment = "brought forward from a store without events";
+        const SQLite::Column ticket = row.getColumn(5);
+        event.ticket = foundation::toHex(sha256(
+            {static_cast<const std::byte*>(ticket.getBlob()), static_cast<std::size_t>(ticket.getBytes())}));
+        event.previous = previous;
+        event.hash = hashOf(event);
+        insertEvent(database, event);
+        previous = event.hash;
+    }
+}
+
+}  // namespace
+
+void configureSqlite(SQLite::Database& database) {
+    database.exec("PRAGMA foreign_keys = ON");
+    database.exec("PRAGMA synchronous = FULL");
+}
+
+void createSqliteSchema(SQLite::Database& database) {
+    SQLite::Transaction transaction(database);
+    database.exec(kRecordTables);
+    database.exec(kEventTable);
+    setVersion(database);
+    transaction.commit();
+}
+
+void upgradeSqliteSchema(SQLite::Database& database, const std::string& path) {
+    if (versionOf(database) == kCurrentVersion) return;
+    SQLite::Transaction transaction(database, SQLite::TransactionBehavior::IMMEDIATE);
+    const int version = versionOf(database);  // another process may have been first
+    if (version == kCurrentVersion) return;
+    if (version != 1) {
+        throw Failure(EX_DATAERR,
+                      format("%@: record store of version %d; this program knows versions 1 to %d", path,
+                             version, kCurrentVersion));
+    }
+    keepCopy(path, version);
+    database.exec(kEventTable);
+    logExistingRecords(database);
+    setVersion(database);
+    transaction.commit();
+}
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,288 @@
+#include "lumora-local/sqlite_store.h"
+
+#include <SQLiteCpp/SQLiteCpp.h>
+#include <sqlite3.h>
+
+#include <functional>
+#include <limits>
+
+#include "foundation/format.h"
+#include "lumora-local/failure.h"
+#include "lumora-local/file_writing.h"
+#include "lumora-local/sha256.h"
+#include "lumora-local/sqlite_rows.h"
+#include "lumora-local/sqlite_schema.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::ByteView;
+using foundation::Data;
+using foundation::Date;
+using foundation::format;
+
+int exitStatusFor(int sqliteCode) {
+    switch (sqliteCode & 0xFF) {
+        case SQLITE_BUSY:
+        case SQLITE_LOCKED:
+            return EX_TEMPFAIL;
+        case SQLITE_CANTOPEN:
+            return EX_NOINPUT;
+        case SQLITE_CORRUPT:
+        case SQLITE_NOTADB:
+            return EX_DATAERR;
+        case SQLITE_PERM:
+        case SQLITE_READONLY:
+            return EX_NOPERM;
+        default:
+            return EX_IOERR;
+    }
+}
+
+/// Runs database work; what the library throws becomes a Failure.
+template <class Work>
+auto guarded(Work&& work) {
+    try {
+        return std::forward<Work>(work)();
+    } catch (const SQLite::Exception& error) {
+        throw Failure(exitStatusFor(error.getErrorCode()), format("record store: %s", error.what()));
+    }
+}
+
+std::string environmentText(Environment environment) {
+    return std::string(toString(environment));
+}
+
+Data toData(const SQLite::Column& column) {
+    const auto* bytes = static_cast<const std::byte*>(column.getBlob());
+    const ByteView view(bytes, bytes == nullptr ? 0 : static_cast<std::size_t>(column.getBytes()));
+    return foundation::toData(view);
+}
+
+void bindBlob(SQLite::Statement& statement, int index, ByteView bytes) {
+    if (bytes.size() > static_cast<std::size_t>(std::numeric_limits<int>::max())) {
+        throw Failure(EX_DATAERR, "a ticket too large for the record store");
+    }
+    statement.bind(index, static_cast<const void*>(bytes.data()), static_cast<int>(bytes.size()));
+}
+
+/// Of the record of that name; `nullopt` if there is none.
+std::optional<bool> isRevoked(SQLite::Database& database, Environment environment, const std::string& name) {
+    SQLite::Statement row(database, "SELECT revoked FROM record WHERE environment = ? AND name = ?");
+    row.bind(1, environmentText(environment));
+    row.bind(2, name);
+    if (!row.executeStep()) return std::nullopt;
+    return row.getColumn(0).getInt() != 0;
+}
+
+void deleteRecord(SQLite::Database& database, Environment environment, const std::string& name) {
+    SQLite::Statement statement(database, "DELETE FROM record WHERE environment = ? AND name = ?");
+    statement.bind(1, environmentText(environment));
+    statement.bind(2, name);
+    statement.exec();
+}
+
+void insertRecord(SQLite::Database& database, Environment environment, const SignedRecord& entry) {
+    const Record& record = entry.record;
+    SQLite::Statement statement(
+        database,
+        "INSERT INTO record (environment, name, label, revoked, signed_at, asset, ticket)"
+        " VALUES (?, ?, ?, ?, ?, ?, ?)");
+    statement.bind(1, environmentText(environment));
+    statement.bind(2, record.name);
+    statement.bind(3, record.label);
+    statement.bind(4, record.revoked ? 1 : 0);
+    statement.bind(5, record.signedAt.seconds);
+    if (record.asAsset) statement.bind(6, foundation::toHex(sha256(entry.ticket)));
+    bindBlob(statement, 7, entry.ticket);
+    statement.exec();
+}
+
+void insertHashes(SQLite::Database& database, Environment environment, const Record& record) {
+    SQLite::Statement statement(
+        database, "INSERT INTO hash (environment, name, position, algorithm, hash) VALUES (?, ?, ?, ?, ?)");
+    std::int64_t position = 0;
+    for (const CodeHash& hash : record.hashes) {
+        statement.reset();
+        statement.bind(1, environmentText(environment));
+        statement.bind(2, record.name);
+        statement.bind(3, position++);
+        statement.bind(4, hash.algorithm);
+        bindBlob(statement, 5, hash.hash);
+        statement.exec();
+    }
+}
+
+constexpr const char* kRecordColumns =
+    "SELECT name, label, revoked, signed_at, asset IS NOT NULL FROM record ";
+
+Record readRecord(SQLite::Database& database, Environment environment, SQLite::Statement& row) {
+    Record record;
+    record.name = row.getColumn(0).getString();
+    record.label = row.getColumn(1).getString();
+    record.revoked = row.getColumn(2).getInt() != 0;
+    record.signedAt = Date{row.getColumn(3).getInt64()};
+    record.asAsset = row.getColumn(4).getInt() != 0;
+
+    SQLite::Statement hashes(
+        database, "SELECT algorithm, hash FROM hash WHERE environment = ? AND name = ? ORDER BY position");
+    hashes.bind(1, environmentText(environment));
+    hashes.bind(2, record.name);
+    while (hashes.executeStep()) {
+        record.hashes.push_back({hashes.getColumn(0).getUInt(), toData(hashes.getColumn(1))});
+    }
+    return record;
+}
+
+}  // namespace
+
+void SqliteStore::create(const std::string& path) {
+    writeNewFile(path, {}, 0600);  // SQLite gives the files that it adds the mode of this one
+    guarded([&] {
+        SQLite::Database database(path, SQLite::OPEN_READWRITE, kBusyTimeoutMilliseconds);
+        configureSqlite(database);
+        database.exec("PRAGMA journal_mode = WAL");
+        createSqliteSchema(database);
+    });
+}
+
+SqliteStore::SqliteStore(const std::string& path) {
+    guarded([&] {
+        database_ =
+            std::make_unique<SQLite::Database>(path, SQLite::OPEN_READWRITE, kBusyTimeoutMilliseconds);
+        configureSqlite(*database_);
+        upgradeSqliteSchema(*database_, path);
+    });
+}
+
+SqliteStore::~SqliteStore() = default;
+
+std::optional<Delivery> SqliteStore::findTicket(Environment environment, const std::string& recordName) {
+    const std::lock_guard lock(mutex_);
+    return guarded([&]() -> std::optional<Delivery> {
+        // An asset's bytes are left where they are: the answer needs their number alone.
+        SQLite::Statement row(*database_,
+                              "SELECT asset, length(ticket), CASE WHEN asset IS NULL THEN ticket END"
+                              " FROM record WHERE environment = ? AND name = ?");
+        row.bind(1, environmentText(environment));
+        row.bind(2, recordName);
+        if (!row.executeStep()) return std::nullopt;
+        Delivery delivery;
+        if (row.getColumn(0).isNull()) {
+            delivery.inlineTicket = toData(row.getColumn(2));
+        } else {
+            delivery.asset = Delivery::Asset{row.getColumn(0).getString(),
+                                             static_cast<std::uint64_t>(row.getColumn(1).getInt64())};
+        }
+        return delivery;
+    });
+}
+
+std::optional<Data> SqliteStore::findAsset(const std::string& identifier) {
+    const std::lock_guard lock(mutex_);
+    return guarded([&]() -> std::optional<Data> {
+        SQLite::Statement row(*database_, "SELECT ticket FROM record WHERE asset = ? LIMIT 1");
+        row.bind(1, identifier);
+        if (!row.executeStep()) return std::nullopt;
+        return toData(row.getColumn(0));
+    });
+}
+
+std::size_t SqliteStore::countRecords() {
+    const std::lock_guard lock(mutex_);
+    return guarded([&] {
+        return static_cast<std::size_t>(database_->execAndGet("SELECT count(*) FROM record").getInt64());
+    });
+}
+
+void SqliteStore::put(Environment environment, const std::vector<SignedRecord>& records,
+                      const Occasion& occasion) {
+    const std::lock_guard lock(mutex_);
+    guarded([&] {
+        // Immediate: a transaction that starts by reading cannot be upgraded behind another writer.
+        SQLite::Transaction transaction(*database_, SQLite::TransactionBehavior::IMMEDIATE);
+        std::string previous = lastEventHash(*database_);
+        for (const SignedRecord& entry : records) {
+            const Action action =
+                actionOf(entry.record, isRevoked(*database_, environment, entry.record.name), occasion);
+            deleteRecord(*database_, environment, entry.record.name);
+            insertRecord(*database_, environment, entry);
+            insertHashes(*database_, environment, entry.record);
+            const Event event = makeEvent(environment, entry, action, occasion, std::move(previous));
+            insertEvent(*database_, event);
+            previous = event.hash;
+        }
+        transaction.commit();
+    });
+}
+
+std::optional<Record> SqliteStore::find(Environment environment, const std::string& recordName) {
+    const std::lock_guard lock(mutex_);
+    return guarded([&]() -> std::optional<Record> {
+        SQLite::Statement row(*database_, std::string(kRecordColumns) + "WHERE environment = ? AND name = ?");
+        row.bind(1, environmentText(environment));
+        row.bind(2, recordName);
+        if (!row.executeStep()) return std::nullopt;
+        return readRecord(*database_, environment, row);
+    });
+}
+
+std::vector<Record> SqliteStore::list(Environment environment) {
+    const std::lock_guard lock(mutex_);
+    return guarded([&] {
+        SQLite::Statement row(*database_,
+                              std::string(kRecordColumns) + "WHERE environment = ? ORDER BY name");
+        row.bind(1, environmentText(environment));
+        std::vector<Record> records;
+        while (row.executeStep()) records.push_back(readRecord(*database_, environment, row));
+        return records;
+    });
+}
+
+void SqliteStore::forEachEvent(const EventQuery& query, const std::function<void(const Event&)>& visit) {
+    const std::lock_guard lock(mutex_);
+    guarded([&] {
+        SQLite::Statement row(*database_, std::string("SELECT ") + kEventColumns +
+                                              " FROM event WHERE (?1 IS NULL OR record = ?1)"
+                                              " AND (?2 IS NULL OR time >= ?2) ORDER BY position");
+        if (query.record) row.bind(1, *query.record);
+        if (query.since) row.bind(2, query.since->seconds);
+        while (row.executeStep()) visit(readEvent(row));
+    });
+}
+
+void SqliteStore::walkHistory(const HistoryVisitor& visitor) {
+    const std::lock_guard lock(mutex_);
+    guarded([&] {
+        const SQLite::Transaction snapshot(*database_);  // both walks see one state; rolled back at the end
+        SQLite::Statement events(*database_,
+                                 std::string("SELECT ") + kEventColumns + " FROM event ORDER BY position");
+        while (events.executeStep()) visitor.event(readEvent(events));
+
+        SQLite::Statement records(
+            *database_,
+            "SELECT r.environment, r.name, r.ticket, r.revoked, e.ticket, e.action FROM record r"
+            " LEFT JOIN event e ON e.position = (SELECT max(position) FROM event"
+            " WHERE environment = r.environment AND record = r.name)");
+        while (records.executeStep()) {
+            RecordState state;
+            state.environment =
+                parseEnvironment(records.getColumn(0).getString()).value_or(Environment::production);
+            state.name = records.getColumn(1).getString();
+            state.ticket = foundation::toHex(sha256(toData(records.getColumn(2))));
+            state.revoked = records.getColumn(3).getInt() != 0;
+            if (!records.getColumn(4).isNull()) {
+                state.lastTicket = records.getColumn(4).getString();
+                state.lastAction = parseAction(records.getColumn(5).getString());
+            }
+            visitor.record(state);
+        }
+    });
+}
+
+std::string SqliteStore::headHash() {
+    const std::lock_guard lock(mutex_);
+    return guarded([&] { return lastEventHash(*database_); });
+}
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,44 @@
+// A record store in one SQLite database.
+//
+// The database is in WAL mode, so readers never wait; a writer waits for another one for a few seconds before
+// it fails (EX_TEMPFAIL).
+#pragma once
+
+#include <memory>
+#include <mutex>
+
+#include "lumora-local/record_store.h"
+
+namespace SQLite {
+class Database;
+}
+
+namespace pinwell::lumora {
+
+class SqliteStore final : public RecordStore {
+  public:
+    /// Makes an empty store, readable by its owner alone. Throws Failure if anything is at `path`.
+    static void create(const std::string& path);
+
+    /// Opens an existing one. A store of an earlier version is brought forward first, in one transaction; a
+    /// copy of what it was stays beside it (`PATH.version-1`). Throws Failure.
+    explicit SqliteStore(const std::string& path);
+    ~SqliteStore() override;
+
+    std::optional<Delivery> findTicket(Environment environment, const std::string& recordName) override;
+    std::optional<foundation::Data> findAsset(const std::string& identifier) override;
+    std::size_t countRecords() override;
+    void put(Environment environment, const std::vector<SignedRecord>& records,
+             const Occasion& occasion) override;
+    std::optional<Record> find(Environment environment, const std::string& recordName) override;
+    std::vector<Record> list(Environment environment) override;
+    void forEachEvent(const EventQuery& query, const std::function<void(const Event&)>& visit) override;
+    void walkHistory(const HistoryVisitor& visitor) override;
+    std::string headHash() override;
+
+  private:
+    std::mutex mutex_;  // a connection's statements are not to be mixed
+    std::unique_ptr<SQLite::Database> database_;
+};
+
+}  // namespace pinwell::lumora
