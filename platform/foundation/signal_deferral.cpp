@@ -6,6 +6,7 @@
 #include <atomic>
 #include <csignal>
 #include <cstddef>
+#include <mutex>
 
 namespace pinwell::foundation {
 namespace {
@@ -18,6 +19,10 @@ std::array<std::atomic<bool>, kDeferred.size()> arrived;
 static_assert(std::atomic<bool>::is_always_lock_free, "a signal handler may touch nothing else");
 std::array<struct sigaction, kDeferred.size()> before;
 
+// Of several deferrals the first one puts off, and the last one lets through.
+std::mutex mutex;
+std::size_t alive = 0;
+
 void note(int number) {
     for (std::size_t i = 0; i < kDeferred.size(); ++i)
         if (kDeferred.at(i) == number) arrived.at(i) = true;
@@ -26,12 +31,13 @@ void note(int number) {
 }  // namespace
 
 SignalDeferral::SignalDeferral() {
+    const std::lock_guard lock(mutex);
+    if (alive++ > 0) return;
     struct sigaction noting {};
     noting.sa_handler = note;
     noting.sa_flags = SA_RESTART;  // nothing is to notice
     sigemptyset(&noting.sa_mask);
     for (std::size_t i = 0; i < kDeferred.size(); ++i) {
-        arrived.at(i) = false;
         sigaction(kDeferred.at(i), nullptr, &before.at(i));
         // Ignored from the start, by nohup(1) for instance: it is the caller's wish.
         if (before.at(i).sa_handler != SIG_IGN) sigaction(kDeferred.at(i), &noting, nullptr);
@@ -39,9 +45,15 @@ SignalDeferral::SignalDeferral() {
 }
 
 SignalDeferral::~SignalDeferral() {
-    for (std::size_t i = 0; i < kDeferred.size(); ++i) sigaction(kDeferred.at(i), &before.at(i), nullptr);
+    {
+        const std::lock_guard lock(mutex);
+        if (--alive > 0) return;
+        for (std::size_t i = 0; i < kDeferred.size(); ++i) sigaction(kDeferred.at(i), &before.at(i), nullptr);
+    }
+    // Without the lock: what the signal starts may take its time. A deferral that began meanwhile puts the
+    // signal off once more.
     for (std::size_t i = 0; i < kDeferred.size(); ++i)
-        if (arrived.at(i)) kill(getpid(), kDeferred.at(i));
+        if (arrived.at(i).exchange(false)) kill(getpid(), kDeferred.at(i));
 }
 
 }  // namespace pinwell::foundation

@@ -8,6 +8,7 @@
 #include <cstdlib>
 #include <optional>
 #include <thread>
+#include <vector>
 
 namespace pinwell::foundation {
 namespace {
@@ -58,6 +59,28 @@ TEST_F(Deferral, HoldsForSignalsThatAnotherThreadTakes) {
     EXPECT_EQ(taken, 0);
     deferral.reset();
     EXPECT_EQ(taken, 1);
+}
+
+TEST_F(Deferral, OfSeveralTheLastOneLetsSignalsThrough) {
+    std::optional<SignalDeferral> first(std::in_place);
+    std::optional<SignalDeferral> second(std::in_place);
+    send(SIGTERM);
+    first.reset();
+    EXPECT_EQ(taken, 0);
+    second.reset();
+    EXPECT_EQ(taken, 1);
+}
+
+TEST_F(Deferral, MayLiveInManyThreadsAtOnce) {
+    std::vector<std::thread> threads;
+    for (int i = 0; i < 4; ++i)
+        threads.emplace_back([] {
+            for (int round = 0; round < 200; ++round) const SignalDeferral deferral;
+        });
+    for (int i = 0; i < 50; ++i) send(SIGTERM);
+    for (std::thread& thread : threads) thread.join();
+    send(SIGINT);
+    EXPECT_GT(taken, 1);
 }
 
 TEST_F(Deferral, LeavesAnIgnoredSignalIgnored) {
