@@ -5,12 +5,15 @@
 
 #include <cerrno>
 #include <string_view>
+#include <utility>
 
 namespace pinwell {
 
 std::uint8_t verboseLevel = kVerbosityNormal;
 
 namespace {
+
+thread_local const MessageReceiver* receiverOfThread = nullptr;
 
 // Whoever shares the pipe may have made it non-blocking; a reader that lags is waited for all the same. False
 // when there is nothing to wait for.
@@ -22,7 +25,22 @@ bool waitForReader() {
 
 }  // namespace
 
+MessageRedirection::MessageRedirection(MessageReceiver receiver)
+    : receiver_(std::move(receiver)), before_(std::exchange(receiverOfThread, &receiver_)) {}
+
+MessageRedirection::~MessageRedirection() {
+    receiverOfThread = before_;
+}
+
+bool messagesAreRedirected() noexcept {
+    return receiverOfThread != nullptr;
+}
+
 void writeMessageLine(std::string line) {
+    if (receiverOfThread != nullptr) {
+        (*receiverOfThread)(std::move(line));
+        return;
+    }
     line += '\n';
     std::string_view rest = line;
     while (!rest.empty()) {

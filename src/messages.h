@@ -5,6 +5,7 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <string>
 
 #include "foundation/format.h"
@@ -18,7 +19,27 @@ inline constexpr std::uint8_t kVerbosityQuiet = 255;
 /// Written during the option scan, before any other thread exists; only read afterwards.
 extern std::uint8_t verboseLevel;
 
-/// Writes `line` and a newline to standard output.
+/// Takes a line, without its newline.
+using MessageReceiver = std::function<void(std::string line)>;
+
+/// While it lives, the lines of the calling thread go to `receiver` and not to standard output. The receiver
+/// gets the user's lines even in quiet mode. A redirection inside another one replaces it until it ends.
+class MessageRedirection {
+  public:
+    explicit MessageRedirection(MessageReceiver receiver);
+    ~MessageRedirection();
+    MessageRedirection(const MessageRedirection&) = delete;
+    MessageRedirection& operator=(const MessageRedirection&) = delete;
+
+  private:
+    const MessageReceiver receiver_;
+    const MessageReceiver* const before_;
+};
+
+/// Whether the calling thread's lines are redirected.
+bool messagesAreRedirected() noexcept;
+
+/// Writes `line` and a newline to standard output, or hands it to the calling thread's receiver.
 void writeMessageLine(std::string line);
 
 /// A diagnostic line, shown in verbose mode only.
@@ -30,7 +51,8 @@ void NoisyLog(foundation::FormatString<std::type_identity_t<Args>...> format, co
 /// A line for the user, shown unless quiet.
 template <class... Args>
 void MessageLog(foundation::FormatString<std::type_identity_t<Args>...> format, const Args&... args) {
-    if (verboseLevel != kVerbosityQuiet) writeMessageLine(foundation::format(format, args...));
+    if (verboseLevel != kVerbosityQuiet || messagesAreRedirected())
+        writeMessageLine(foundation::format(format, args...));
 }
 
 }  // namespace pinwell

@@ -1,11 +1,15 @@
 #include "src/messages.h"
 
 #include <fcntl.h>
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <poll.h>
 #include <unistd.h>
 
+#include <string>
 #include <thread>
+#include <utility>
+#include <vector>
 
 #include "support/message_capture.h"
 
@@ -45,6 +49,50 @@ TEST(Messages, TextFromAFileCannotDriveTheTerminal) {
     const MessageCapture capture(kVerbosityNormal);
     MessageLog("name: %@", std::string("a\x1b[31m\nb"));
     EXPECT_EQ(capture.text(), "name: a\\x1b[31m\\nb\n");
+}
+
+TEST(Messages, RedirectedLinesGoToTheReceiverOnly) {
+    const MessageCapture capture(kVerbosityVerbose);
+    std::vector<std::string> received;
+    {
+        const MessageRedirection redirection([&](std::string line) { received.push_back(std::move(line)); });
+        MessageLog("for the user %d", 1);
+        NoisyLog("for diagnosis");
+    }
+    MessageLog("after it");
+    EXPECT_THAT(received, testing::ElementsAre("for the user 1", "for diagnosis"));
+    EXPECT_EQ(capture.text(), "after it\n");
+}
+
+TEST(Messages, AReceiverGetsTheUsersLinesInQuietModeToo) {
+    const MessageCapture capture(kVerbosityQuiet);
+    std::vector<std::string> received;
+    const MessageRedirection redirection([&](std::string line) { received.push_back(std::move(line)); });
+    MessageLog("for the user");
+    NoisyLog("for diagnosis");
+    EXPECT_THAT(received, testing::ElementsAre("for the user"));
+}
+
+TEST(Messages, ARedirectionIsOfItsThreadAlone) {
+    const MessageCapture capture(kVerbosityNormal);
+    std::vector<std::string> received;
+    const MessageRedirection redirection([&](std::string line) { received.push_back(std::move(line)); });
+    std::thread([] { MessageLog("of another thread"); }).join();
+    EXPECT_THAT(received, testing::IsEmpty());
+    EXPECT_EQ(capture.text(), "of another thread\n");
+}
+
+TEST(Messages, AnInnerRedirectionReplacesTheOuterOneUntilItEnds) {
+    std::vector<std::string> outer;
+    std::vector<std::string> inner;
+    const MessageRedirection first([&](std::string line) { outer.push_back(std::move(line)); });
+    {
+        const MessageRedirection second([&](std::string line) { inner.push_back(std::move(line)); });
+        MessageLog("inside");
+    }
+    MessageLog("outside");
+    EXPECT_THAT(inner, testing::ElementsAre("inside"));
+    EXPECT_THAT(outer, testing::ElementsAre("outside"));
 }
 
 TEST(Messages, AClosedOutputLosesTheLineAndNothingElse) {
