@@ -8,12 +8,12 @@
 #include "codesign/superblob.h"
 #include "foundation/format.h"
 #include "inspect/gather_ticket.h"
-#include "src/DownloadDelegate.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "src/PWHashedFile/file_kind.h"
 #include "src/PWHashedFile/package_trailer.h"
+#include "src/ticket_record.h"
 
 namespace pinwell::inspect {
 namespace {

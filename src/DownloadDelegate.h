@@ -22,9 +22,10 @@ inline constexpr std::uint8_t kOperationNone = 0;
 inline constexpr std::uint8_t kOperationStaple = 1;
 inline constexpr std::uint8_t kOperationValidate = 2;
 
-/// The name of the record that holds the ticket for a code hash: "2/ALGORITHM/HEX", or "1/HEX" when the
-/// algorithm is 0.
-std::string recordNameForHash(std::uint32_t algorithm, foundation::ByteView hash);
+/// Judges the server of a challenge by the two server policies, one after the other, and completes the
+/// challenge. Prints what speaks against a server.
+void answerServerChallenge(const https::AuthenticationChallenge& challenge,
+                           const https::ChallengeCompletion& completion);
 
 class DownloadDelegate : public https::SessionDelegate {
   public:
@@ -94,7 +95,6 @@ class DownloadDelegate : public https::SessionDelegate {
     void notifyResult();
 
   private:
-    std::optional<URL> lookupURL(std::optional<Error>& error) const;
     std::string recordName();
     std::optional<Data> ticketFromResponse(const foundation::Value& response, bool& downloading);
     std::string fileName() const;

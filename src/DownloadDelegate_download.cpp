@@ -3,29 +3,11 @@
 #include "foundation/byte_count.h"
 #include "src/DownloadDelegate.h"
 #include "src/messages.h"
+#include "src/ticket_record.h"
 
 namespace pinwell {
-namespace {
-
-constexpr std::string_view kFileNameToken = "${f}";
-constexpr std::string_view kAssetFileName = "lmasset.ticket";
-constexpr int kHTTPStatusOK = 200;
-
-std::string replacingAll(std::string_view text, std::string_view token, std::string_view replacement) {
-    std::string replaced;
-    while (true) {
-        const std::size_t at = text.find(token);
-        replaced += text.substr(0, at);
-        if (at == std::string_view::npos) return replaced;
-        replaced += replacement;
-        text.remove_prefix(at + token.size());
-    }
-}
-
-}  // namespace
-
 bool DownloadDelegate::asynchronouslyDownloadLargeTicketFromURLString(const std::string& urlTemplate) {
-    const std::string text = replacingAll(urlTemplate, kFileNameToken, kAssetFileName);
+    const std::string text = assetURLText(urlTemplate);
     https::Request request;
     request.url = URL::fromString(text);
     if (!request.url) MessageLog("Large ticket was requested from an invalid URL: %@", request.url);

@@ -7,65 +7,12 @@
 #include "foundation/process.h"
 #include "src/DownloadDelegate.h"
 #include "src/messages.h"
+#include "src/ticket_record.h"
 
 namespace pinwell {
 
-using foundation::Array;
 using foundation::Dictionary;
 using foundation::Value;
-
-namespace {
-
-constexpr std::string_view kDefaultContainer = "com.ostrel.tm.ticket-delivery";
-constexpr std::string_view kProduction = "production";
-constexpr std::string_view kDevelopment = "development";
-
-constexpr std::string_view kDefaultsDomain = "com.ostrel.tm.pinwell";
-constexpr std::string_view kContainerKey = "lm-container";
-constexpr std::string_view kProductionKey = "lm-production";
-
-constexpr std::string_view kRequestIdentifierHeader = "X-Ostrel-Request-UUID";
-
-constexpr int kRecordNameVersionPlain = 1;
-constexpr int kRecordNameVersionWithAlgorithm = 2;
-
-URL lookupURLForHost(const std::string& host, std::string_view container, std::string_view environment) {
-    // The host was checked when it was read, so this is a URL whatever the container holds.
-    return URL::fromString("https://" + host)
-        ->appendingPathComponent(
-            foundation::format("database/1/%@/%@/public/records/lookup", container, environment));
-}
-
-// Text of a member that must be text when it is there at all.
-const std::string* textOrNil(const Value& value) {
-    if (value.isNil()) return nullptr;
-    if (value.string() == nullptr) throw foundation::ValueTypeError("a text was expected");
-    return value.string();
-}
-
-}  // namespace
-
-std::optional<URL> DownloadDelegate::lookupURL(std::optional<Error>& error) const {
-    const auto host = platform_.directory.lumoraHost();
-    if (!host) {
-        error = host.error();
-        return std::nullopt;
-    }
-    if (!platform_.directory.allowsInternalSecurityPolicies())
-        return lookupURLForHost(*host, kDefaultContainer, kProduction);
-
-    const auto defaults = platform_.userDefaults.openDomain(kDefaultsDomain);
-    defaults->registerDefaults(
-        {{std::string(kContainerKey), kDefaultContainer}, {std::string(kProductionKey), true}});
-    return lookupURLForHost(*host, defaults->stringForKey(kContainerKey),
-                            defaults->boolForKey(kProductionKey) ? kProduction : kDevelopment);
-}
-
-std::string recordNameForHash(std::uint32_t algorithm, foundation::ByteView hash) {
-    const std::string hex = foundation::toHex(hash);
-    if (algorithm == 0) return foundation::format("%d/%@", kRecordNameVersionPlain, hex);
-    return foundation::format("%d/%d/%@", kRecordNameVersionWithAlgorithm, algorithm, hex);
-}
 
 std::string DownloadDelegate::recordName() {
     const Data hash = hashedFile_->cdHash().value_or(Data{});
@@ -89,24 +36,18 @@ bool DownloadDelegate::grabTicket() {
         return false;
     }
 
-    std::optional<Error> configurationError;
-    https::Request request;
-    request.url = lookupURL(configurationError);
-
-    const Value body = Dictionary{{"records", Array{Dictionary{{"recordName", recordName()}}}}};
-    auto serialized = foundation::serializeJSON(body);
-    if (!serialized) return false;
-    request.method = "POST";
-    request.body = std::move(*serialized);
-    request.addHeader("Content-Type", "application/json");
+    const auto url = lookupURL(platform_);
+    const Value body = lookupBody({recordName()});
+    auto request = lookupRequest(url ? std::optional(*url) : std::nullopt, body);
+    if (!request) return false;
     Dictionary headers;
-    for (const auto& [name, value] : request.headers) headers.emplace(name, value);
+    for (const auto& [name, value] : request->headers) headers.emplace(name, value);
     NoisyLog("JSON Data is %@", body);
     NoisyLog(" Headers: %@", headers);
 
-    if (configurationError) {
+    if (!url) {
         // Without a host there is nothing to connect to: the lookup has failed before it began.
-        lookupDidComplete(std::nullopt, std::nullopt, configurationError);
+        lookupDidComplete(std::nullopt, std::nullopt, url.error());
         return true;
     }
     auto session = platform_.https.ephemeralSession(*this);
@@ -116,7 +57,7 @@ bool DownloadDelegate::grabTicket() {
     }
     lookupSession_ = *std::move(session);
     const auto task = lookupSession_->dataTask(
-        std::move(request), [this](const auto& data, const auto& response, const auto& error) {
+        *std::move(request), [this](const auto& data, const auto& response, const auto& error) {
             lookupDidComplete(data, response, error);
         });
     task->resume();
@@ -165,22 +106,17 @@ void DownloadDelegate::lookupDidComplete(const std::optional<Data>& data,
     notifyResult();
 }
 
-// Throws when the response does not have the shape that is expected of it.
+// Throws if the response does not have the shape that is expected of it.
 std::optional<Data> DownloadDelegate::ticketFromResponse(const Value& response, bool& downloading) {
-    const Value& record = response["records"][std::size_t{0}];
-    const Value& fields = record["fields"];
-    const Value& ticketValue = fields["signedTicket"]["value"];
-    const Value& asset = fields["signedTicketAsset"]["value"];
-    const Value& downloadURL = asset["downloadURL"];
-    setLargeTicketSize(asset["size"]);
-
-    if (const std::string* ticket = textOrNil(ticketValue)) return foundation::decodeBase64(*ticket);
-    if (const std::string* url = textOrNil(downloadURL); url != nullptr && !url->empty()) {
+    const TicketRecord record = ticketRecordOf(response);
+    setLargeTicketSize(record.assetSize);
+    if (const std::string* ticket = record.ticketText()) return foundation::decodeBase64(*ticket);
+    if (const std::string* url = record.assetURLTemplate()) {
         downloading = asynchronouslyDownloadLargeTicketFromURLString(*url);
         return std::nullopt;
     }
     MessageLog("Lumora query for %@ (%@) failed due to \"%@\".", fileName(), prettyHashString(),
-               record["reason"]);
+               record.reason);
     return std::nullopt;
 }
 

@@ -45,6 +45,11 @@ bool accepts(trust::Trust& serverTrust, const trust::PolicyRef& policy) {
 
 void DownloadDelegate::didReceiveChallenge(https::Session&, const https::AuthenticationChallenge& challenge,
                                            const https::ChallengeCompletion& completion) {
+    answerServerChallenge(challenge, completion);
+}
+
+void answerServerChallenge(const https::AuthenticationChallenge& challenge,
+                           const https::ChallengeCompletion& completion) {
     NoisyLog("Domain is %@", challenge.host);
     if (challenge.method != https::AuthenticationMethod::serverTrust) {
         completion(https::Disposition::performDefaultHandling, std::nullopt);

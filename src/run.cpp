@@ -7,11 +7,6 @@
 #include "src/messages.h"
 
 namespace pinwell {
-namespace {
-
-// False when another process has it. What cannot be locked, since there is no such file or its file system
-// knows no locks, is left to those that come after: before they write, they look at what has changed in the
-// meantime.
 bool lockArtefact(const Platform& platform, const URL& path, std::unique_ptr<files::ItemLock>& lock) {
     auto locked = platform.files.lockItem(path);
     if (locked) {
@@ -22,8 +17,6 @@ bool lockArtefact(const Platform& platform, const URL& path, std::unique_ptr<fil
     MessageLog("Another process keeps %@ locked. Nothing was written to it.", path.path());
     return false;
 }
-
-}  // namespace
 
 int runOperation(std::uint8_t operation, const URL& path, const Platform& platform,
                  const std::function<void()>& waitForEnd) {

@@ -3,11 +3,18 @@
 
 #include <cstdint>
 #include <functional>
+#include <memory>
 
 #include "foundation/url.h"
 #include "src/platform.h"
 
 namespace pinwell {
+
+/// Takes the lock of an artefact that is about to be stapled into `lock`, and waits for it. Returns false,
+/// and says so, only if another process holds it. Without locks (unsupported, or no such file) the run goes
+/// on: every write checks the file's state again.
+bool lockArtefact(const Platform& platform, const foundation::URL& path,
+                  std::unique_ptr<files::ItemLock>& lock);
 
 /// The exit status of a run that started nothing and recorded no other.
 inline constexpr int kExitNothingRecorded = 1;

@@ -119,6 +119,7 @@ bool PWHashedFile::refuseChangedFile(const std::optional<URL>& workingCopy) {
     MessageLog("%@ has changed since it was read. Nothing was written to it.", fileURL_->path());
     // What cannot be removed is a copy beside the file, and no harm.
     if (workingCopy) static_cast<void>(platform_.files.removeItem(workingCopy->deletingLastPathComponent()));
+    refusedAsChanged_ = true;
     setAppropriateExitCode(kExitCannotCreate);
     return false;
 }

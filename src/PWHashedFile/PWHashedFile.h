@@ -66,6 +66,12 @@ class PWHashedFile {
 
     const std::optional<URL>& fileURL() const noexcept { return fileURL_; }
 
+    /// Whether the file still is what was read (noteState). True if no state was noted.
+    bool isAsRead() const;
+
+    /// A write was refused because the file had changed since it was read.
+    bool wasRefusedAsChanged() const noexcept { return refusedAsChanged_; }
+
     /// The stapled ticket, and the cdhash; nothing when there is none. Computed once, on first use.
     std::optional<Data> ticketData();
     std::optional<Data> cdHash();
@@ -121,10 +127,10 @@ class PWHashedFile {
     [[noreturn]] void mustOverride(std::string_view operation) const;
     std::optional<Data> cached(std::optional<Data>& cache, std::optional<Data> (PWHashedFile::*hook)());
     std::optional<URL> makeWorkingCopy();
-    bool isAsRead() const;
     bool refuseChangedFile(const std::optional<URL>& workingCopy);
 
     bool revoked_ = false;
+    bool refusedAsChanged_ = false;
     std::int32_t appropriateExitCode_ = kExitOK;
     std::uint32_t digestAlgorithm_ = 0;
     std::optional<URL> fileURL_;

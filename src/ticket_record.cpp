@@ -1,0 +1,110 @@
+#include "src/ticket_record.h"
+
+#include <utility>
+
+#include "foundation/json.h"
+
+namespace pinwell {
+
+using foundation::Array;
+using foundation::Dictionary;
+using foundation::URL;
+using foundation::Value;
+
+namespace {
+
+constexpr std::string_view kDefaultContainer = "com.ostrel.tm.ticket-delivery";
+constexpr std::string_view kProduction = "production";
+constexpr std::string_view kDevelopment = "development";
+
+constexpr std::string_view kDefaultsDomain = "com.ostrel.tm.pinwell";
+constexpr std::string_view kContainerKey = "lm-container";
+constexpr std::string_view kProductionKey = "lm-production";
+
+constexpr int kRecordNameVersionPlain = 1;
+constexpr int kRecordNameVersionWithAlgorithm = 2;
+
+constexpr std::string_view kFileNameToken = "${f}";
+constexpr std::string_view kAssetFileName = "lmasset.ticket";
+
+URL lookupURLForHost(const std::string& host, std::string_view container, std::string_view environment) {
+    // The host was checked when it was read, so this is a URL whatever the container holds.
+    return URL::fromString("https://" + host)
+        ->appendingPathComponent(
+            foundation::format("database/1/%@/%@/public/records/lookup", container, environment));
+}
+
+// A member that must be text if it is there.
+const std::string* textOrNil(const Value& value) {
+    if (value.isNil()) return nullptr;
+    if (value.string() == nullptr) throw foundation::ValueTypeError("a text was expected");
+    return value.string();
+}
+
+}  // namespace
+
+std::string recordNameForHash(std::uint32_t algorithm, foundation::ByteView hash) {
+    const std::string hex = foundation::toHex(hash);
+    if (algorithm == 0) return foundation::format("%d/%@", kRecordNameVersionPlain, hex);
+    return foundation::format("%d/%d/%@", kRecordNameVersionWithAlgorithm, algorithm, hex);
+}
+
+foundation::Result<URL> lookupURL(const Platform& platform) {
+    const auto host = platform.directory.lumoraHost();
+    if (!host) return host.error();
+    if (!platform.directory.allowsInternalSecurityPolicies())
+        return lookupURLForHost(*host, kDefaultContainer, kProduction);
+
+    const auto defaults = platform.userDefaults.openDomain(kDefaultsDomain);
+    defaults->registerDefaults(
+        {{std::string(kContainerKey), kDefaultContainer}, {std::string(kProductionKey), true}});
+    return lookupURLForHost(*host, defaults->stringForKey(kContainerKey),
+                            defaults->boolForKey(kProductionKey) ? kProduction : kDevelopment);
+}
+
+Value lookupBody(const std::vector<std::string>& recordNames) {
+    Array records;
+    for (const std::string& name : recordNames) records.push_back(Dictionary{{"recordName", name}});
+    return Dictionary{{"records", std::move(records)}};
+}
+
+std::optional<https::Request> lookupRequest(std::optional<URL> url, const Value& body) {
+    auto serialized = foundation::serializeJSON(body);
+    if (!serialized) return std::nullopt;
+    https::Request request;
+    request.url = std::move(url);
+    request.method = "POST";
+    request.body = std::move(*serialized);
+    request.addHeader("Content-Type", "application/json");
+    return request;
+}
+
+const std::string* TicketRecord::ticketText() const {
+    return textOrNil(ticket);
+}
+
+const std::string* TicketRecord::assetURLTemplate() const {
+    const std::string* const text = textOrNil(assetURL);
+    return text == nullptr || text->empty() ? nullptr : text;
+}
+
+TicketRecord ticketRecordOf(const Value& answer) {
+    const Value& record = answer["records"][std::size_t{0}];
+    const Value& fields = record["fields"];
+    const Value& ticket = fields["signedTicket"]["value"];
+    const Value& asset = fields["signedTicketAsset"]["value"];
+    return {ticket, asset["downloadURL"], asset["size"], record["reason"]};
+}
+
+std::string assetURLText(std::string_view urlTemplate) {
+    std::string text;
+    while (true) {
+        const std::size_t at = urlTemplate.find(kFileNameToken);
+        text += urlTemplate.substr(0, at);
+        if (at == std::string_view::npos) return text;
+        text += kAssetFileName;
+        urlTemplate.remove_prefix(at + kFileNameToken.size());
+    }
+}
+
+}  // namespace pinwell

@@ -1,0 +1,68 @@
+// What the record service is asked, and how its answer is read: the protocol of a lookup, without a
+// connection.
+//
+//   POST https://HOST/database/1/CONTAINER/ENVIRONMENT/public/records/lookup    application/json
+//        {"records": [{"recordName": "2/2/..."}]}
+//     -> {"records": [RECORD]}, where of a RECORD is read:
+//        fields.signedTicket.value                     the ticket in base64
+//        fields.signedTicketAsset.value.downloadURL    where a large one is, with the token "${f}" in it
+//        fields.signedTicketAsset.value.size           its length in bytes
+//        reason                                        why there is none
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "foundation/value.h"
+#include "https/session.h"
+#include "src/platform.h"
+
+namespace pinwell {
+
+/// The response header that names a request.
+inline constexpr std::string_view kRequestIdentifierHeader = "X-Ostrel-Request-UUID";
+
+/// The HTTP status of a download that worked.
+inline constexpr int kHTTPStatusOK = 200;
+
+/// The name of the record that holds the ticket for a code hash: "2/ALGORITHM/HEX", or "1/HEX" if the
+/// algorithm is 0.
+std::string recordNameForHash(std::uint32_t algorithm, foundation::ByteView hash);
+
+/// Where records are looked up: the platform directory's host, and the container and environment of the user
+/// defaults where the build variant allows them. The error says what is wrong with platform.json.
+foundation::Result<foundation::URL> lookupURL(const Platform& platform);
+
+/// The body of a lookup of these records, in their order.
+foundation::Value lookupBody(const std::vector<std::string>& recordNames);
+
+/// The POST that looks these records up. Without a URL, a request that does not start. `nullopt` if a name is
+/// not UTF-8.
+std::optional<https::Request> lookupRequest(std::optional<foundation::URL> url,
+                                            const foundation::Value& body);
+
+/// The parts of a record that are read, each nil if the record does not have it.
+struct TicketRecord {
+    foundation::Value ticket;
+    foundation::Value assetURL;  // of no account where there is a ticket
+    foundation::Value assetSize;
+    foundation::Value reason;
+
+    /// The ticket in base64. Null if there is none. Throws foundation::ValueTypeError if it is no text.
+    const std::string* ticketText() const;
+
+    /// The template of the asset's URL. Null if there is none or it is empty. Throws as ticketText().
+    const std::string* assetURLTemplate() const;
+};
+
+/// The first record of an answer. Throws foundation::ValueTypeError or std::out_of_range if the answer does
+/// not have the shape of one.
+TicketRecord ticketRecordOf(const foundation::Value& answer);
+
+/// The text of an asset's URL: the template with a file name in place of each "${f}".
+std::string assetURLText(std::string_view urlTemplate);
+
+}  // namespace pinwell
