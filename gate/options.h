@@ -1,0 +1,35 @@
+// What pinwell-gate was asked to do.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace pinwell::gate {
+
+/// What an artefact must satisfy beside being as it was signed.
+struct Policy {
+    std::optional<std::int64_t> maximumTicketAge;  // in seconds
+    std::vector<std::string> teams;                // any of them; empty: every one
+    std::vector<std::string> identifiers;          // globs, any of them; empty: every one
+    bool requiresSecureTimestamp = false;
+};
+
+enum class Format { text, json, sarif, junit, html };
+
+struct Options {
+    enum class Tickets { online, offline, directory };
+
+    Tickets tickets = Tickets::online;
+    std::string ticketDirectory;
+    bool isShallow = false;
+    bool isRecursive = false;
+    Policy policy;
+    Format format = Format::text;
+    std::string output;       // a file; empty: standard output
+    std::string attestation;  // a file; empty: none
+    std::vector<std::string> paths;
+};
+
+}  // namespace pinwell::gate

@@ -1,0 +1,170 @@
+#include "verify/directory.h"
+
+#include <dirent.h>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <climits>
+#include <cstring>
+
+#include "codesign/code_error.h"
+#include "foundation/handle.h"
+
+namespace pinwell::verify {
+
+using codesign::CodeError;
+using foundation::FileDescriptor;
+
+namespace {
+
+[[noreturn]] void fail(int number, const std::string& name) {
+    const bool isNotThere = number == ENOENT || number == ENOTDIR || number == ELOOP || number == ENXIO;
+    const std::string reason = std::strerror(number);
+    throw CodeError(isNotThere ? codesign::kStaticCodeNotFound : codesign::kIOError, name + ": " + reason);
+}
+
+bool isName(std::string_view name) {
+    return !name.empty() && name != "." && name != ".." && name.find('/') == std::string_view::npos &&
+           name.find('\0') == std::string_view::npos;
+}
+
+FileDescriptor openBelow(int directory, const std::string& name, int flags) {
+    if (!isName(name)) throw CodeError(codesign::kStaticCodeNotFound, "no name of a file");
+    for (;;) {
+        FileDescriptor opened(openat(directory, name.c_str(),
+                                     flags | O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+        if (opened) return opened;
+        if (errno != EINTR) fail(errno, name);
+    }
+}
+
+EntryKind kindFrom(mode_t mode) {
+    switch (mode & S_IFMT) {
+        case S_IFREG:
+            return EntryKind::file;
+        case S_IFDIR:
+            return EntryKind::directory;
+        case S_IFLNK:
+            return EntryKind::link;
+        default:
+            return EntryKind::other;
+    }
+}
+
+using Listing = foundation::Handle<DIR, closedir>;
+
+// Splits off the last name; the rest may be empty.
+std::pair<std::string_view, std::string_view> splitLast(std::string_view path) {
+    const std::size_t slash = path.rfind('/');
+    if (slash == std::string_view::npos) return {{}, path};
+    return {path.substr(0, slash), path.substr(slash + 1)};
+}
+
+}  // namespace
+
+OpenFile::OpenFile(FileDescriptor file) : file_(std::move(file)) {
+    struct stat status = {};
+    if (fstat(file_.get(), &status) != 0) fail(errno, "the file");
+    if (!S_ISREG(status.st_mode)) throw CodeError(codesign::kStaticCodeNotFound, "not a regular file");
+    size_ = static_cast<std::uint64_t>(status.st_size);
+}
+
+void OpenFile::expectSequentialReads() const {
+    posix_fadvise(file_.get(), 0, 0, POSIX_FADV_SEQUENTIAL);
+}
+
+std::size_t OpenFile::readAt(std::uint64_t offset, std::span<std::byte> buffer) const {
+    std::size_t done = 0;
+    while (done < buffer.size()) {
+        const ssize_t count =
+            pread(file_.get(), buffer.data() + done, buffer.size() - done, static_cast<off_t>(offset + done));
+        if (count < 0 && errno == EINTR) continue;
+        if (count < 0) fail(errno, "the file");
+        if (count == 0) break;
+        done += static_cast<std::size_t>(count);
+    }
+    return done;
+}
+
+DirectoryRef OpenDirectory::atPath(const std::string& path) {
+    FileDescriptor opened(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_DIRECTORY | O_CLOEXEC));
+    if (!opened) fail(errno, path);
+    return DirectoryRef(new OpenDirectory(std::move(opened)));
+}
+
+std::vector<Entry> OpenDirectory::entries(std::size_t limit) const {
+    // Of its own position, so that several threads may list at once.
+    FileDescriptor own(openat(directory_.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (!own) fail(errno, "the directory");
+    const Listing listing(fdopendir(own.get()));
+    if (!listing) fail(errno, "the directory");
+    own.release();
+
+    std::vector<Entry> found;
+    for (;;) {
+        errno = 0;
+        const dirent* const entry = readdir(listing.get());
+        if (entry == nullptr) {
+            if (errno != 0) fail(errno, "the directory");
+            break;
+        }
+        const std::string_view name = entry->d_name;
+        if (name == "." || name == "..") continue;
+        if (found.size() == limit) throw CodeError(codesign::kUnimplemented, "too many files");
+        struct stat status = {};
+        if (fstatat(directory_.get(), entry->d_name, &status, AT_SYMLINK_NOFOLLOW) != 0)
+            fail(errno, std::string(name));
+        found.push_back({std::string(name), kindFrom(status.st_mode)});
+    }
+    std::sort(found.begin(), found.end(), [](const Entry& a, const Entry& b) { return a.name < b.name; });
+    return found;
+}
+
+std::optional<EntryKind> OpenDirectory::kindOf(const std::string& name) const {
+    struct stat status = {};
+    if (!isName(name)) return std::nullopt;
+    if (fstatat(directory_.get(), name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0)
+        return kindFrom(status.st_mode);
+    if (errno == ENOENT || errno == ENOTDIR) return std::nullopt;
+    fail(errno, name);
+}
+
+DirectoryRef OpenDirectory::directory(const std::string& name) const {
+    return DirectoryRef(new OpenDirectory(openBelow(directory_.get(), name, O_DIRECTORY)));
+}
+
+std::unique_ptr<OpenFile> OpenDirectory::file(const std::string& name) const {
+    return std::make_unique<OpenFile>(openBelow(directory_.get(), name, 0));
+}
+
+std::string OpenDirectory::linkTarget(const std::string& name) const {
+    if (!isName(name)) throw CodeError(codesign::kStaticCodeNotFound, "no name of a file");
+    std::array<char, PATH_MAX> target{};
+    const ssize_t length = readlinkat(directory_.get(), name.c_str(), target.data(), target.size());
+    if (length < 0) fail(errno, name);
+    return {target.data(), static_cast<std::size_t>(length)};
+}
+
+std::unique_ptr<OpenFile> OpenDirectory::fileAt(std::string_view relativePath) const {
+    const auto [parents, name] = splitLast(relativePath);
+    if (parents.empty()) return file(std::string(name));
+    return directoryAt(parents)->file(std::string(name));
+}
+
+DirectoryRef OpenDirectory::directoryAt(std::string_view relativePath) const {
+    DirectoryRef current;
+    while (!relativePath.empty()) {
+        const std::size_t slash = relativePath.find('/');
+        const std::string name(relativePath.substr(0, slash));
+        current = (current ? *current : *this).directory(name);
+        relativePath = slash == std::string_view::npos ? std::string_view() : relativePath.substr(slash + 1);
+    }
+    if (!current) throw CodeError(codesign::kStaticCodeNotFound, "no path of a directory");
+    return current;
+}
+
+}  // namespace pinwell::verify

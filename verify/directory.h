@@ -1,0 +1,70 @@
+// A directory inside an artefact, held open: everything is reached from it name by name, and no link is ever
+// followed, so nothing outside the artefact is opened whatever happens to its paths meanwhile.
+#pragma once
+
+#include <sys/types.h>
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "codesign/byte_source.h"
+#include "foundation/file_io.h"
+
+namespace pinwell::verify {
+
+enum class EntryKind { file, directory, link, other };
+
+struct Entry {
+    std::string name;
+    EntryKind kind = EntryKind::other;
+};
+
+/// The bytes of an open regular file, with the size it had when it was opened.
+class OpenFile final : public codesign::ByteSource {
+  public:
+    /// Throws codesign::CodeError unless it is a regular file.
+    explicit OpenFile(foundation::FileDescriptor file);
+
+    std::uint64_t size() const override { return size_; }
+    void expectSequentialReads() const override;
+
+  private:
+    std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const override;
+
+    foundation::FileDescriptor file_;
+    std::uint64_t size_ = 0;
+};
+
+/// Immutable; may be used from any number of threads. Every method throws codesign::CodeError: kIOError if
+/// something cannot be read, kStaticCodeNotFound if it is not there or is of another kind.
+class OpenDirectory;
+using DirectoryRef = std::shared_ptr<const OpenDirectory>;
+
+class OpenDirectory {
+  public:
+    /// The directory at a path of the caller's. Only its last component must not be a link.
+    static DirectoryRef atPath(const std::string& path);
+
+    /// In byte order of the names. At most `limit`; throws kUnimplemented for more.
+    std::vector<Entry> entries(std::size_t limit) const;
+
+    std::optional<EntryKind> kindOf(const std::string& name) const;
+    DirectoryRef directory(const std::string& name) const;
+    std::unique_ptr<OpenFile> file(const std::string& name) const;
+    std::string linkTarget(const std::string& name) const;
+
+    /// The same by a path of names with slashes between, every one but the last a directory.
+    std::unique_ptr<OpenFile> fileAt(std::string_view relativePath) const;
+    DirectoryRef directoryAt(std::string_view relativePath) const;
+
+  private:
+    explicit OpenDirectory(foundation::FileDescriptor directory) : directory_(std::move(directory)) {}
+
+    foundation::FileDescriptor directory_;
+};
+
+}  // namespace pinwell::verify

@@ -1,0 +1,80 @@
+#include "verify/disk_image.h"
+
+#include "codesign/code_error.h"
+#include "codesign/disk_image_trailer.h"
+#include "codesign/superblob.h"
+#include "foundation/byte_reader.h"
+#include "foundation/format.h"
+#include "verify/check_names.h"
+#include "verify/page_hashes.h"
+
+namespace pinwell::verify {
+
+using codesign::ByteSource;
+using codesign::CodeError;
+using codesign::DiskImageTrailer;
+using codesign::FileRange;
+using foundation::format;
+
+namespace {
+
+const std::string kPlace = "disk image";
+
+/// Where the signature is: it ends at the trailer, or it is none.
+std::optional<FileRange> signatureArea(const DiskImageTrailer& trailer, Section& section) {
+    const std::optional<FileRange> area = trailer.signature();
+    if (!area) return std::nullopt;
+    if (area->offset > trailer.offset() || area->length != trailer.offset() - area->offset) {
+        section.fail(kTrailer, format("trailer (from byte %llu on)", trailer.offset()),
+                     "a signature that ends at the trailer",
+                     format("%llu bytes from byte %llu on", area->length, area->offset));
+    }
+    return area;
+}
+
+void checkSigned(const ByteSource& source, const DiskImageTrailer& trailer, const FileRange& area,
+                 const SignatureParts& parts, Workers& workers, Section& section) {
+    section.pass(kSignature, kPlace, "a well-formed signature");
+    const Data canonical = trailer.canonicalBytes();
+    const FileRange code{0, area.offset};
+    checkSigner(parts, kPlace, section);
+    checkSpecialSlots(parts, {{codesign::kSlotTrailer, {.bytes = &canonical, .mustBeCovered = true}}}, kPlace,
+                      section);
+    checkCodeLimit(parts, code.length, "the signature", kPlace, section);
+    checkPageHashes(source, code, parts, kPlace, workers, section);
+}
+
+VerifiedCode verified(const ByteSource& source, Workers& workers, Section& section) {
+    const std::optional<DiskImageTrailer> trailer = DiskImageTrailer::read(source);
+    if (!trailer) {
+        section.fail(kTrailer, "end of the file", "a disk image's trailer", "none");
+        return {};
+    }
+    const std::optional<FileRange> area = signatureArea(*trailer, section);
+    if (!area) return {};
+    if (worstOutcome(section) == Outcome::failed) return {.isSigned = true, .identities = {}};
+    const std::optional<SignatureParts> parts =
+        SignatureParts::fromSuperBlob(codesign::readSuperBlob(source, area->offset, area->length));
+    if (!parts) return {};  // it carries a ticket and nothing else
+    checkSigned(source, *trailer, *area, *parts, workers, section);
+    return {.isSigned = true, .identities = {identityOf(*parts, kPlace)}};
+}
+
+}  // namespace
+
+VerifiedCode verifyDiskImage(const ByteSource& source, Workers& workers, Section& section) {
+    try {
+        return verified(source, workers, section);
+    } catch (const CodeError& error) {
+        if (error.status() == codesign::kIOError) {
+            section.cannotRead(kSignature, kPlace, error.what());
+        } else {
+            section.fail(kSignature, kPlace, "a well-formed signature", error.what());
+        }
+    } catch (const foundation::ShortRead& error) {
+        section.fail(kSignature, kPlace, "a well-formed signature", error.what());
+    }
+    return {.isSigned = true, .identities = {}};
+}
+
+}  // namespace pinwell::verify

@@ -1,0 +1,152 @@
+#include "verify/executable.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "codesign/cms_signature.h"
+#include "codesign/code_error.h"
+#include "codesign/executable_image.h"
+#include "codesign/superblob.h"
+#include "foundation/byte_reader.h"
+#include "foundation/format.h"
+#include "verify/check_names.h"
+#include "verify/image_layout.h"
+#include "verify/page_hashes.h"
+
+namespace pinwell::verify {
+
+using codesign::ByteSource;
+using codesign::CodeError;
+using codesign::FileRange;
+using codesign::ImageSlice;
+using foundation::format;
+
+namespace {
+
+/// An embedded property list is read whole.
+constexpr std::uint64_t kMaximumEmbeddedList = std::uint64_t{16} * 1024 * 1024;
+
+std::optional<Data> embeddedPropertyList(const ByteSource& source, const ImageSlice& slice,
+                                         const ImageLayout& layout) {
+    if (!layout.propertyList) return std::nullopt;
+    const FileRange& range = *layout.propertyList;
+    if (range.offset > slice.range.length || range.length > slice.range.length - range.offset ||
+        range.length > kMaximumEmbeddedList)
+        codesign::refuse("the embedded property list lies outside its place");
+    return source.read(slice.range.offset + range.offset, static_cast<std::size_t>(range.length));
+}
+
+class ImageCheck {
+  public:
+    ImageCheck(const ByteSource& source, const OutsideComponents& outside, std::string place,
+               Workers& workers, Section& section)
+        : source_(source),
+          outside_(outside),
+          place_(std::move(place)),
+          workers_(workers),
+          section_(section) {}
+
+    VerifiedCode run() && {
+        const std::vector<ImageSlice> slices = codesign::readSlices(source_);
+        checkUniversalHeader(source_, slices, place_, section_);
+        const ImageSlice* const preferred = &codesign::preferredSlice(slices);
+        std::vector<std::string> unsignedSlices;
+        for (const ImageSlice& slice : slices) {
+            const std::string at = slices.size() == 1 ? place_ : place_ + ", " + sliceName(slice.cpuType);
+            std::optional<CodeIdentity> identity;
+            if (!checkSlice(slice, at, identity)) unsignedSlices.push_back(at);
+            if (!identity) continue;
+            const auto where = &slice == preferred ? code_.identities.begin() : code_.identities.end();
+            code_.identities.insert(where, *std::move(identity));
+        }
+        code_.isSigned = unsignedSlices.size() < slices.size();
+        for (const std::string& at : unsignedSlices) section_.fail(kSignature, at, "a signature", "none");
+        return std::move(code_);
+    }
+
+  private:
+    /// False if the slice is not signed.
+    bool checkSlice(const ImageSlice& slice, const std::string& at, std::optional<CodeIdentity>& identity) {
+        const std::optional<FileRange> area = codesign::findImageSignature(source_, slice);
+        if (!area) return false;
+        try {
+            std::optional<SignatureParts> parts =
+                SignatureParts::fromSuperBlob(codesign::readSuperBlob(source_, area->offset, area->length));
+            if (!parts) return false;
+            section_.pass(kSignature, at, "a well-formed signature");
+            checkContents(slice, *area, *parts, at);
+            identity = identityOf(*parts, at);
+        } catch (const CodeError& error) {
+            reportBroken(at, error);
+        } catch (const foundation::ShortRead& error) {
+            section_.fail(kSignature, at, "a well-formed signature", error.what());
+        }
+        return true;
+    }
+
+    void reportBroken(const std::string& at, const CodeError& error) {
+        if (error.status() == codesign::kIOError) {
+            section_.cannotRead(kSignature, at, error.what());
+        } else {
+            section_.fail(kSignature, at, "a well-formed signature", error.what());
+        }
+    }
+
+    void checkContents(const ImageSlice& slice, const FileRange& area, const SignatureParts& parts,
+                       const std::string& at) {
+        const ImageLayout layout = readImageLayout(source_, slice);
+        OutsideComponents outside = outside_;
+        std::optional<Data> embedded;
+        if (!outside.contains(kSlotPropertyList)) {
+            embedded = embeddedPropertyList(source_, slice, layout);
+            // It lies in the code, so the page hashes cover it.
+            if (embedded) outside[kSlotPropertyList] = {.bytes = &*embedded, .mustBeCovered = false};
+        }
+        const FileRange code{slice.range.offset, area.offset - slice.range.offset};
+        checkSigner(parts, at, section_);
+        checkSpecialSlots(parts, outside, at, section_);
+        checkCodeLimit(parts, code.length, "the signature", at, section_);
+        checkBehindSignature(source_, slice, layout, area, at, section_);
+        checkPageHashes(source_, code, parts, at, workers_, section_);
+    }
+
+    const ByteSource& source_;
+    const OutsideComponents& outside_;
+    const std::string place_;
+    Workers& workers_;
+    Section& section_;
+    VerifiedCode code_;
+};
+
+}  // namespace
+
+CodeIdentity identityOf(const SignatureParts& parts, std::string place) {
+    const codesign::CodeDirectory& chosen = parts.chosen().content;
+    CodeIdentity identity;
+    identity.place = std::move(place);
+    identity.codeHashes = parts.codeHashes();
+    identity.digestType = static_cast<std::uint32_t>(chosen.digestType());
+    identity.identifier = chosen.identifier();
+    identity.team = chosen.teamIdentifier();
+    identity.hasSecureTimestamp = codesign::secureTimestamp(parts.cms()).has_value();
+    return identity;
+}
+
+VerifiedCode verifyExecutable(const ByteSource& source, const OutsideComponents& outside,
+                              const std::string& place, Workers& workers, Section& section) {
+    try {
+        return ImageCheck(source, outside, place, workers, section).run();
+    } catch (const CodeError& error) {
+        // Headers that lead nowhere: what is signed can no longer be told.
+        if (error.status() == codesign::kIOError) {
+            section.cannotRead(kImageStructure, place, error.what());
+        } else {
+            section.fail(kImageStructure, place, "a well-formed executable image", error.what());
+        }
+    } catch (const foundation::ShortRead& error) {
+        section.fail(kImageStructure, place, "a well-formed executable image", error.what());
+    }
+    return {.isSigned = true, .identities = {}};
+}
+
+}  // namespace pinwell::verify

@@ -1,0 +1,53 @@
+// What deep verification asks of the headers of an executable image, beside where its signature is
+// (codesign/executable_image.h, whose layout tables hold here too): which parts are mapped as code, where the
+// embedded property list is, and whether the bytes that no hash covers are the ones that no hash can cover.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "codesign/executable_image.h"
+#include "verify/check.h"
+
+namespace pinwell::verify {
+
+using codesign::ByteSource;
+using codesign::FileRange;
+
+/// A segment command (0x1 or 0x19) of a thin image. Ranges count from the slice's start.
+struct Segment {
+    std::string name;
+    FileRange range;
+    bool isExecutable = false;  // now or after a change of protection
+};
+
+struct ImageLayout {
+    std::uint32_t cpuType = 0;
+    std::uint32_t cpuSubtype = 0;
+    std::vector<Segment> segments;
+    std::optional<FileRange> propertyList;  // section __info_plist of segment __TEXT
+};
+
+/// Throws codesign::CodeError or foundation::ShortRead.
+ImageLayout readImageLayout(const ByteSource& source, const codesign::ImageSlice& slice);
+
+/// Asks of a universal image that its list of slices says of each what the slice says of itself, that its
+/// gaps are zero, and that nothing is after the last slice. Passes for a thin image.
+void checkUniversalHeader(const ByteSource& source, const std::vector<codesign::ImageSlice>& slices,
+                          const std::string& place, Section& section);
+
+/// Asks that no segment which can be executed reaches to the signature, and that the slice ends with it but
+/// for padding of zeros. Offsets of `signature` count from the file's start.
+void checkBehindSignature(const ByteSource& source, const codesign::ImageSlice& slice,
+                          const ImageLayout& layout, const FileRange& signature, const std::string& place,
+                          Section& section);
+
+/// Whether a range of the source is all zero. Throws codesign::CodeError.
+bool isZero(const ByteSource& source, const FileRange& range);
+
+/// "64-bit ARM slice", "64-bit x86 slice", "slice of CPU type 0x...".
+std::string sliceName(std::uint32_t cpuType);
+
+}  // namespace pinwell::verify

@@ -1,0 +1,51 @@
+// Digests of many short pieces: one context that is used again for each of them.
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <memory>
+#include <string_view>
+
+#include "codesign/digest.h"
+
+namespace pinwell::verify {
+
+using foundation::ByteView;
+using foundation::Data;
+
+/// Every digest that an artefact may state.
+enum class Algorithm { md5, sha1, sha224, sha256, sha384, sha512 };
+
+Algorithm algorithmOf(codesign::DigestType type);
+std::size_t digestLength(Algorithm algorithm);
+
+/// For one thread at a time. Throws std::bad_alloc if the algorithm cannot be had here (for want of memory,
+/// or by local policy).
+class PageDigest {
+  public:
+    explicit PageDigest(Algorithm algorithm);
+    ~PageDigest();
+    PageDigest(PageDigest&&) noexcept;
+    PageDigest& operator=(PageDigest&&) noexcept;
+
+    /// Of one piece. The result is good until the next call.
+    ByteView of(ByteView bytes);
+
+    // Of a piece that comes in pieces itself.
+    void begin();
+    void update(ByteView bytes);
+    ByteView finish();
+
+  private:
+    struct State;
+    std::unique_ptr<State> state_;
+};
+
+/// The thread's own, kept for its life: making one costs as much as using it on a page.
+PageDigest& threadDigest(Algorithm algorithm);
+
+/// A buffer of `kBufferSize` bytes, the thread's own. A function that uses it calls none that does.
+inline constexpr std::size_t kBufferSize = std::size_t{512} * 1024;
+std::span<std::byte> threadBuffer();
+
+}  // namespace pinwell::verify

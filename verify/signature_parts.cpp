@@ -1,0 +1,219 @@
+#include "verify/signature_parts.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "codesign/cms_signature.h"
+#include "codesign/code_error.h"
+#include "codesign/disk_image_trailer.h"
+#include "codesign/superblob.h"
+#include "foundation/byte_reader.h"
+#include "foundation/format.h"
+#include "verify/check_names.h"
+
+namespace pinwell::verify {
+
+using codesign::CodeDirectory;
+using codesign::refuse;
+using foundation::ByteReader;
+using foundation::format;
+
+namespace {
+
+constexpr std::uint32_t kEndOfComponentSlots = 0x1000;
+
+bool isDirectorySlot(std::uint32_t slot) {
+    return slot == codesign::kSlotCodeDirectory ||
+           (slot >= codesign::kSlotFirstAlternate && slot <= codesign::kSlotLastAlternate);
+}
+
+// CodeDirectory::parse has shown that these fields are there and what they lead to lies in the blob.
+Directory withFields(std::uint32_t slot, CodeDirectory content) {
+    Directory directory{.slot = slot, .content = std::move(content)};
+    ByteReader reader(directory.content.bytes());
+    reader.seek(16, "hash offset");
+    directory.hashOffset = reader.be32("hash offset");
+    reader.skip(4, "identifier offset");
+    directory.specialSlots = reader.be32("special slots");
+    directory.codeSlots = reader.be32("code slots");
+    directory.limit = reader.be32("limit");
+    reader.skip(3, "digest size and type, platform");
+    directory.pageShift = reader.u8("page size");
+    reader.skip(4, "spare");
+    if (directory.content.version() >= codesign::kVersionWithScatter)
+        directory.hasScatter = reader.be32("scatter offset") != 0;
+    if (directory.content.version() >= codesign::kVersionWithLimit64) {
+        reader.seek(56, "limit as 64 bits");
+        if (const std::uint64_t limit = reader.be64("limit as 64 bits"); limit != 0) directory.limit = limit;
+    }
+    return directory;
+}
+
+}  // namespace
+
+std::string Directory::digestName() const {
+    switch (content.digestType()) {
+        case DigestType::sha1:
+            return "SHA-1";
+        case DigestType::sha256:
+            return "SHA-256";
+        case DigestType::sha256Truncated:
+            return "SHA-256 cut";
+        case DigestType::sha384:
+            break;
+    }
+    return "SHA-384";
+}
+
+ByteView Directory::codeDigest(std::uint32_t index) const {
+    const std::size_t size = codesign::digestSize(content.digestType());
+    return content.bytes().subspan(hashOffset + std::size_t{index} * size, size);
+}
+
+void SignatureParts::addDirectory(std::uint32_t slot, ByteView blob) {
+    const bool isKnown = codesign::digestTypeNumbered(CodeDirectory::digestTypeNumberOf(blob)).has_value();
+    if (slot != codesign::kSlotCodeDirectory && !isKnown) return;
+    Directory directory = withFields(slot, CodeDirectory::parse(blob));
+    const auto sameType = [&](const Directory& other) {
+        return other.content.digestType() == directory.content.digestType();
+    };
+    if (std::any_of(directories_.begin(), directories_.end(), sameType))
+        refuse("two code directories of one digest type");
+    directories_.push_back(std::move(directory));
+}
+
+std::optional<SignatureParts> SignatureParts::fromSuperBlob(Data superblob) {
+    SignatureParts parts;
+    const ByteView bytes = parts.storage_.emplace_back(std::move(superblob));
+    std::map<std::uint32_t, ByteView> directories;
+    for (const codesign::Blob& blob : codesign::parseSuperBlob(bytes)) {
+        if (blob.slot == codesign::kSlotCms) {
+            if (blob.magic != codesign::kWrapperMagic) refuse("the CMS blob has a wrong magic");
+            parts.cms_ = blob.bytes.subspan(codesign::kBlobHeaderSize);
+        } else if (isDirectorySlot(blob.slot)) {
+            directories.emplace(blob.slot, blob.bytes);
+        } else if (blob.slot < kEndOfComponentSlots && blob.slot != codesign::kSlotTrailer &&
+                   !parts.components_.emplace(blob.slot, blob.bytes).second) {
+            refuse(format("two components in slot %u", blob.slot));
+        }
+    }
+    if (directories.empty()) return std::nullopt;
+    if (directories.begin()->first != codesign::kSlotCodeDirectory)
+        refuse("alternate code directories without a primary one");
+    for (const auto& [slot, blob] : directories) parts.addDirectory(slot, blob);
+    return parts;
+}
+
+std::optional<SignatureParts> SignatureParts::fromSeparateFiles(Data directory,
+                                                                std::optional<Data> requirements, Data cms) {
+    SignatureParts parts;
+    parts.storage_.reserve(3);
+    parts.addDirectory(codesign::kSlotCodeDirectory, parts.storage_.emplace_back(std::move(directory)));
+    if (requirements)
+        parts.components_.emplace(codesign::kSlotRequirements,
+                                  parts.storage_.emplace_back(*std::move(requirements)));
+    parts.cms_ = parts.storage_.emplace_back(std::move(cms));
+    return parts;
+}
+
+const Directory& SignatureParts::chosen() const {
+    return *std::max_element(directories_.begin(), directories_.end(),
+                             [](const Directory& a, const Directory& b) {
+                                 return codesign::digestStrength(a.content.digestType()) <
+                                        codesign::digestStrength(b.content.digestType());
+                             });
+}
+
+std::vector<Data> SignatureParts::codeHashes() const {
+    const Directory& first = chosen();
+    std::vector<Data> hashes{first.content.codeHash()};
+    for (const Directory& directory : directories_)
+        if (&directory != &first) hashes.push_back(directory.content.codeHash());
+    return hashes;
+}
+
+std::string specialSlotName(std::uint32_t slot) {
+    const char* what = "component";
+    switch (slot) {
+        case kSlotPropertyList:
+            what = "property list";
+            break;
+        case codesign::kSlotRequirements:
+            what = "requirements";
+            break;
+        case kSlotResourceSeal:
+            what = "sealed resources";
+            break;
+        case codesign::kSlotEntitlements:
+            what = "entitlements";
+            break;
+        case codesign::kSlotTrailer:
+            what = "trailer";
+            break;
+        case codesign::kSlotDerEntitlements:
+            what = "entitlements in DER";
+            break;
+        default:
+            break;
+    }
+    return format("special slot %u (%s)", slot, what);
+}
+
+void checkSpecialSlots(const SignatureParts& parts, const OutsideComponents& outside,
+                       const std::string& place, Section& section) {
+    for (const Directory& directory : parts.directories()) {
+        const std::string at = format("%@, %@ code directory", place, directory.digestName());
+        const auto component = [&](std::uint32_t slot) -> std::optional<ByteView> {
+            if (const auto own = parts.components().find(slot); own != parts.components().end())
+                return own->second;
+            const auto other = outside.find(slot);
+            if (other == outside.end() || other->second.bytes == nullptr) return std::nullopt;
+            return ByteView(*other->second.bytes);
+        };
+        FailureList failures(section, kSpecialSlot);
+        std::size_t covered = 0;
+        for (std::uint32_t slot = 1; slot <= directory.specialSlots; ++slot) {
+            const std::optional<Data> stated = directory.content.specialSlotDigest(slot);
+            if (!stated) continue;
+            const std::optional<ByteView> bytes = component(slot);
+            const std::string where = at + ", " + specialSlotName(slot);
+            if (!bytes) {
+                failures.add(Outcome::failed, where, foundation::toHex(*stated), "there is nothing there");
+                continue;
+            }
+            const Data actual = codesign::digest(directory.content.digestType(), *bytes);
+            if (actual != *stated) {
+                failures.add(Outcome::failed, where, foundation::toHex(*stated), foundation::toHex(actual));
+            } else {
+                ++covered;
+            }
+        }
+        const auto requireCovered = [&](std::uint32_t slot) {
+            if (directory.content.specialSlotDigest(slot)) return;
+            failures.add(Outcome::failed, at + ", " + specialSlotName(slot), "a digest that covers it",
+                         "the code directory does not cover it");
+        };
+        for (const auto& [slot, bytes] : parts.components()) requireCovered(slot);
+        for (const auto& [slot, other] : outside)
+            if (other.bytes != nullptr && other.mustBeCovered) requireCovered(slot);
+        if (failures.count() == 0)
+            section.pass(kSpecialSlot, at, format("%zu components with their digests", covered));
+    }
+}
+
+void checkSigner(const SignatureParts& parts, const std::string& place, Section& section) {
+    constexpr const char* kWanted = "a signer's message over the code directory, or none for ad hoc";
+    if (parts.cms().empty()) {
+        if ((parts.chosen().content.flags() & codesign::kFlagAdHoc) != 0) {
+            section.pass(kSigner, place, "no signer: ad hoc");
+        } else {
+            section.fail(kSigner, place, kWanted, "no signer, and not ad hoc");
+        }
+    } else if (codesign::verifyDetachedCms(parts.cms(), parts.directories().front().content.bytes())) {
+        section.pass(kSigner, place, "a signature that verifies");
+    } else {
+        section.fail(kSigner, place, kWanted, "the signer's signature does not verify");
+    }
+}
+
+}  // namespace pinwell::verify

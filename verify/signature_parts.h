@@ -1,0 +1,98 @@
+// A signature taken apart for deep verification: its code directories with the fields that the hashes are
+// read by, its components, and the signer's message.
+//
+// The rules of form are those of codesign/code_directory.h and codesign/superblob.h; here they are applied to
+// every blob, since here every blob counts.
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "codesign/code_directory.h"
+#include "verify/check.h"
+
+namespace pinwell::verify {
+
+using codesign::DigestType;
+using foundation::ByteView;
+using foundation::Data;
+
+/// A code directory and the fields of its header that codesign has no use for.
+struct Directory {
+    std::uint32_t slot = 0;
+    codesign::CodeDirectory content;
+    std::uint32_t hashOffset = 0;
+    std::uint32_t specialSlots = 0;
+    std::uint32_t codeSlots = 0;
+    std::uint64_t limit = 0;     // of the code that the hashes cover, in bytes from its start
+    std::uint8_t pageShift = 0;  // a page is two to this power; 0: all is one page
+    bool hasScatter = false;
+
+    /// "SHA-256" and so on.
+    std::string digestName() const;
+
+    /// The digest of a code slot below codeSlots.
+    ByteView codeDigest(std::uint32_t index) const;
+};
+
+/// Owns all of its bytes.
+class SignatureParts {
+  public:
+    /// From the bytes of a superblob, padding and all. `nullopt` if it has no code directory. Throws
+    /// codesign::CodeError or foundation::ShortRead if it is not well formed.
+    static std::optional<SignatureParts> fromSuperBlob(Data superblob);
+
+    /// From the three files of the separate form.
+    static std::optional<SignatureParts> fromSeparateFiles(Data directory, std::optional<Data> requirements,
+                                                           Data cms);
+
+    /// By slot; slot 0 is the first. Directories of unknown digest types are left out.
+    const std::vector<Directory>& directories() const noexcept { return directories_; }
+
+    /// The one whose hash is the cdhash.
+    const Directory& chosen() const;
+
+    /// The cdhashes of all directories, the chosen one's first.
+    std::vector<Data> codeHashes() const;
+
+    /// Blobs of slots 1 to 0xFFF, header included.
+    const std::map<std::uint32_t, ByteView>& components() const noexcept { return components_; }
+
+    ByteView cms() const noexcept { return cms_; }
+
+  private:
+    SignatureParts() = default;
+    void addDirectory(std::uint32_t slot, ByteView blob);
+
+    std::vector<Data> storage_;  // what the views are of: moved, never copied
+    std::vector<Directory> directories_;
+    std::map<std::uint32_t, ByteView> components_;
+    ByteView cms_;
+};
+
+/// Something that a special slot covers and that does not travel with the signature.
+struct OutsideComponent {
+    const Data* bytes = nullptr;  // null: there is nothing of that kind
+    bool mustBeCovered = true;    // no other hash covers it
+};
+using OutsideComponents = std::map<std::uint32_t, OutsideComponent>;
+
+/// The property list, the resource seal; the trailer is codesign::kSlotTrailer.
+inline constexpr std::uint32_t kSlotPropertyList = 1;
+inline constexpr std::uint32_t kSlotResourceSeal = 3;
+
+/// Holds every special slot of every directory against what it covers, and asks that every component be
+/// covered.
+void checkSpecialSlots(const SignatureParts& parts, const OutsideComponents& outside,
+                       const std::string& place, Section& section);
+
+/// Whether the signer's message verifies, or is rightly absent.
+void checkSigner(const SignatureParts& parts, const std::string& place, Section& section);
+
+/// "special slot 3 (sealed resources)".
+std::string specialSlotName(std::uint32_t slot);
+
+}  // namespace pinwell::verify
