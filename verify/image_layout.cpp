@@ -27,6 +27,9 @@ constexpr std::uint32_t kProtectionExecute = 4;
 constexpr std::size_t kNameSize = 16;
 constexpr std::size_t kUniversalHeaderSize = 8;
 
+/// They are held whole. Those of very large programs take some 100 KiB.
+constexpr std::uint32_t kMaximumLoadCommands = std::uint32_t{16} * 1024 * 1024;
+
 /// Bytes that may be added after a signature to align what follows.
 constexpr std::uint64_t kMaximumPadding = 16;
 
@@ -112,7 +115,7 @@ std::vector<ListedSlice> readList(const ByteSource& source, std::size_t count, b
 void checkListedSlice(const ByteSource& source, const ListedSlice& listed, const std::string& place,
                       FailureList& failures) {
     const std::string at = place + ", " + sliceName(listed.cpuType);
-    const ImageLayout layout = readImageLayout(source, {listed.cpuType, listed.range});
+    const ImageLayout layout = readImageLayout(source, {listed.cpuType, listed.cpuSubtype, listed.range});
     if (layout.cpuType != listed.cpuType || layout.cpuSubtype != listed.cpuSubtype)
         failures.add(Outcome::failed, at + ", entry in the list of slices",
                      format("CPU type 0x%08x, subtype 0x%08x", layout.cpuType, layout.cpuSubtype),
@@ -174,7 +177,7 @@ ImageLayout readImageLayout(const ByteSource& source, const ImageSlice& slice) {
     const std::uint32_t count = header.u32("count of load commands");
     const std::uint32_t size = header.u32("size of load commands");
     const std::size_t headerSize = is64 ? kHeader64 : kHeader32;
-    if (size > codesign::kMaximumLoadCommandsSize || slice.range.length < headerSize ||
+    if (size > kMaximumLoadCommands || slice.range.length < headerSize ||
         size > slice.range.length - headerSize)
         codesign::refuse("the load commands lie outside their place");
 
