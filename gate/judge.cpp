@@ -9,7 +9,7 @@
 #include "codesign/executable_image.h"
 #include "foundation/format.h"
 #include "gate/ticket.h"
-#include "src/DownloadDelegate.h"
+#include "src/ticket_record.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
