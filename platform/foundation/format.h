@@ -172,12 +172,21 @@ class FormatString {
     std::string_view text_;
 };
 
-/// The formatted text.
-template <class... Args>
-std::string format(FormatString<std::type_identity_t<Args>...> format, const Args&... args) {
-    const std::array<format_detail::Argument, sizeof...(Args) + 1> arguments{
-        format_detail::makeArgument(args)..., format_detail::Argument{}};
-    return format_detail::formatArguments(format.text(), std::span(arguments).first(sizeof...(Args)));
-}
+namespace format_detail {
+
+/// The type of `format`.
+struct FormatFunction {
+    template <class... Args>
+    std::string operator()(FormatString<std::type_identity_t<Args>...> format, const Args&... args) const {
+        const std::array<Argument, sizeof...(Args) + 1> arguments{makeArgument(args)..., Argument{}};
+        return formatArguments(format.text(), std::span(arguments).first(sizeof...(Args)));
+    }
+};
+
+}  // namespace format_detail
+
+/// Returns the formatted text. It is an object, not a function: an unqualified call with an argument of the
+/// standard library would also find the function `std::format`.
+inline constexpr format_detail::FormatFunction format{};
 
 }  // namespace pinwell::foundation

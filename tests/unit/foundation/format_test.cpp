@@ -3,9 +3,28 @@
 #include <gtest/gtest.h>
 
 #include <limits>
+#include <string>
+#include <string_view>
+
+namespace rival {
+
+struct Text {
+    operator std::string_view() const { return "ours"; }  // NOLINT: implicit, as the standard strings' is
+};
+
+// An argument-dependent lookup of an unqualified call finds this function, as it finds `std::format`.
+[[maybe_unused]] inline std::string format(const char*, const Text&) {
+    return "the rival's";
+}
+
+}  // namespace rival
 
 namespace pinwell::foundation {
 namespace {
+
+TEST(Format, IsNotReplacedByAFunctionOfAnArgumentsNamespace) {
+    EXPECT_EQ(format("%s", rival::Text()), "ours");
+}
 
 TEST(Format, PassesTextThroughAndHalvesPercentSigns) {
     EXPECT_EQ(format(""), "");
