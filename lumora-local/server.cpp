@@ -166,7 +166,7 @@ class HttpEngine final : public httplib::Server {
         currentExchange = &exchange;
         bool close = lastOne;
         bool peerCloses = false;
-        const bool answered = process_request(stream, lastOne, peerCloses, [&](httplib::Request& request) {
+        const bool answered = process(stream, lastOne, peerCloses, [&](httplib::Request& request) {
             exchange.understood = true;
             connection.allowMore(kMaximumBodySize + kFramingAllowance);
             request.ranges.clear();  // a ticket is served whole
@@ -177,6 +177,17 @@ class HttpEngine final : public httplib::Server {
     }
 
   private:
+    /// Calls the library. Since 0.16 it wants the addresses of both ends, which nothing here reads.
+    template <class Setup, class Self = HttpEngine>
+    bool process(httplib::Stream& stream, bool lastOne, bool& peerCloses, const Setup& setup) {
+        auto& self = static_cast<Self&>(*this);
+        if constexpr (requires { self.process_request(stream, lastOne, peerCloses, setup); }) {
+            return self.process_request(stream, lastOne, peerCloses, setup);
+        } else {
+            return self.process_request(stream, "", 0, "", 0, lastOne, peerCloses, setup);
+        }
+    }
+
     bool answerHead(const httplib::Request& request, httplib::Response& response) {
         std::optional<Answer> answer;
         if (request.target.size() > kMaximumTargetLength) {
