@@ -2,10 +2,8 @@
 
 #include "src/DownloadDelegate.h"
 
-#include <limits>
-
 #include "src/messages.h"
-#include "src/tm_ticket.h"
+#include "src/ticket_verdict.h"
 
 namespace pinwell {
 namespace {
@@ -31,24 +29,19 @@ std::string DownloadDelegate::prettyHashString() {
 
 bool DownloadDelegate::isValidTicketData(const std::optional<Data>& data) {
     hashedFile_->setAppropriateExitCode(kExitDataError);
-    if (!data || data->empty()) return false;
-    if (data->size() > std::numeric_limits<std::uint32_t>::max()) return false;
-
-    tm_ticket* decoded = nullptr;
-    if (satchel_get_validated_tm_ticket(data->data(), data->size(), &decoded, platform_.trust) != 0)
-        return false;
-    const tm_ticket_ptr ticket(decoded);
-    if (ticket == nullptr) return false;
-
-    if ((tm_ticket_get_flags(ticket.get()) & kTicketRevoked) != 0) {
-        hashedFile_->setRevoked(true);
-        hashedFile_->setAppropriateExitCode(kExitNoPermission);
-        return false;
+    switch (judgeTicket(
+        data, [this] { return hashedFile_->cdHash(); }, platform_.trust)) {
+        case TicketVerdict::acceptable:
+            hashedFile_->setAppropriateExitCode(kExitOK);
+            return true;
+        case TicketVerdict::revoked:
+            hashedFile_->setRevoked(true);
+            hashedFile_->setAppropriateExitCode(kExitNoPermission);
+            return false;
+        case TicketVerdict::refused:
+            return false;
     }
-    const auto wanted = hashedFile_->cdHash();
-    if (!wanted || !tm_ticket_lists_cdhash(ticket.get(), *wanted)) return false;
-    hashedFile_->setAppropriateExitCode(kExitOK);
-    return true;
+    return false;
 }
 
 bool DownloadDelegate::isExistingTicketValid() {

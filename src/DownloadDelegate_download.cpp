@@ -29,18 +29,22 @@ void DownloadDelegate::didFinishDownloading(https::Session&, https::Task& task, 
     // Whatever size was announced, and although the stapled ticket has recorded 0: this one was not seen.
     if (!data) hashedFile_->setAppropriateExitCode(kExitDataError);
     const auto response = task.response();
-    if (length != largeTicketSize_.unsignedIntegerValue()) {
-        MessageLog("We were expecting a ticket size of %@ but download a ticket of size %lu",
-                   largeTicketSize_, length);
-        hashedFile_->setAppropriateExitCode(kExitDataError);
-    } else if (response && response->status != kHTTPStatusOK) {
-        MessageLog("Attempting to download larger ticket for %@ failed. %@", fileName(),
-                   https::localizedStringForStatusCode(response->status));
-        hashedFile_->setAppropriateExitCode(kExitNoHost);
-    } else {
-        NoisyLog("Big ticket response is %@", response);
-        NoisyLog("Downloaded large ticket size is %@", foundation::formatByteCount(length));
-        writeDownloadedData(data, nullptr);
+    switch (faultOfAsset(largeTicketSize_, length, response)) {
+        case AssetFault::length:
+            MessageLog("We were expecting a ticket size of %@ but download a ticket of size %lu",
+                       largeTicketSize_, length);
+            hashedFile_->setAppropriateExitCode(kExitDataError);
+            break;
+        case AssetFault::status:
+            MessageLog("Attempting to download larger ticket for %@ failed. %@", fileName(),
+                       https::localizedStringForStatusCode(response->status));
+            hashedFile_->setAppropriateExitCode(kExitNoHost);
+            break;
+        case AssetFault::none:
+            NoisyLog("Big ticket response is %@", response);
+            NoisyLog("Downloaded large ticket size is %@", foundation::formatByteCount(length));
+            writeDownloadedData(data, nullptr);
+            break;
     }
     notifyResult();
 }

@@ -7,6 +7,7 @@
 #include "src/messages.h"
 
 namespace pinwell {
+
 bool lockArtefact(const Platform& platform, const URL& path, std::unique_ptr<files::ItemLock>& lock) {
     auto locked = platform.files.lockItem(path);
     if (locked) {

@@ -24,6 +24,7 @@ constexpr std::string_view kProductionKey = "lm-production";
 constexpr int kRecordNameVersionPlain = 1;
 constexpr int kRecordNameVersionWithAlgorithm = 2;
 
+constexpr int kHTTPStatusOK = 200;
 constexpr std::string_view kFileNameToken = "${f}";
 constexpr std::string_view kAssetFileName = "lmasset.ticket";
 
@@ -94,6 +95,13 @@ TicketRecord ticketRecordOf(const Value& answer) {
     const Value& ticket = fields["signedTicket"]["value"];
     const Value& asset = fields["signedTicketAsset"]["value"];
     return {ticket, asset["downloadURL"], asset["size"], record["reason"]};
+}
+
+AssetFault faultOfAsset(const Value& announcedSize, std::size_t length,
+                        const std::optional<https::HTTPResponse>& response) {
+    if (length != announcedSize.unsignedIntegerValue()) return AssetFault::length;
+    if (response && response->status != kHTTPStatusOK) return AssetFault::status;
+    return AssetFault::none;
 }
 
 std::string assetURLText(std::string_view urlTemplate) {

@@ -25,9 +25,6 @@ namespace pinwell {
 /// The response header that names a request.
 inline constexpr std::string_view kRequestIdentifierHeader = "X-Ostrel-Request-UUID";
 
-/// The HTTP status of a download that worked.
-inline constexpr int kHTTPStatusOK = 200;
-
 /// The name of the record that holds the ticket for a code hash: "2/ALGORITHM/HEX", or "1/HEX" if the
 /// algorithm is 0.
 std::string recordNameForHash(std::uint32_t algorithm, foundation::ByteView hash);
@@ -61,6 +58,15 @@ struct TicketRecord {
 /// The first record of an answer. Throws foundation::ValueTypeError or std::out_of_range if the answer does
 /// not have the shape of one.
 TicketRecord ticketRecordOf(const foundation::Value& answer);
+
+/// What speaks against a downloaded asset, looked at in this order.
+enum class AssetFault : std::uint8_t {
+    none,
+    length,  // it is not as long as the record says; a record that says nothing says 0
+    status,  // the answer is another one than 200
+};
+AssetFault faultOfAsset(const foundation::Value& announcedSize, std::size_t length,
+                        const std::optional<https::HTTPResponse>& response);
 
 /// The text of an asset's URL: the template with a file name in place of each "${f}".
 std::string assetURLText(std::string_view urlTemplate);

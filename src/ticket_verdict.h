@@ -1,0 +1,25 @@
+// Whether a ticket is good for a file: the one rule that stapling, validating and fetching go by.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <optional>
+
+#include "foundation/bytes.h"
+#include "trust/trust.h"
+
+namespace pinwell {
+
+enum class TicketVerdict : std::uint8_t {
+    acceptable,  // genuine, not revoked, and it lists the hash
+    revoked,     // genuine, and it marks the software as revoked, whatever it lists
+    refused,     // anything else
+};
+
+/// Judges the bytes of a ticket. `hash` is called only for a ticket that is genuine and not revoked; without
+/// a hash the ticket is refused. Prints nothing. From any thread.
+TicketVerdict judgeTicket(const std::optional<foundation::Data>& ticket,
+                          const std::function<std::optional<foundation::Data>()>& hash,
+                          trust::TrustService& trust);
+
+}  // namespace pinwell
