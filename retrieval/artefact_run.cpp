@@ -1,0 +1,268 @@
+#include "retrieval/artefact_run.h"
+
+#include <utility>
+
+#include "foundation/json.h"
+#include "foundation/process.h"
+#include "src/DownloadDelegate.h"
+#include "src/PWHashedFile/PWHashedBundle.h"
+#include "src/PWHashedFile/PWHashedDiskImage.h"
+#include "src/PWHashedFile/PWHashedFlatPackage.h"
+#include "src/messages.h"
+#include "src/run.h"
+#include "src/ticket_record.h"
+
+namespace pinwell::retrieval {
+namespace {
+
+using foundation::URL;
+
+// The controller would have ended the process here.
+struct RunEnded {
+    int status;
+};
+
+// Sessions without a connection: what the controller asks is kept, and the answer comes from elsewhere.
+class KeptTask : public https::Task {
+  public:
+    explicit KeptTask(const https::Request& request) : canStart_(request.url.has_value()) {}
+
+    void resume() override {
+        if (canStart_ && state_ == https::TaskState::suspended) state_ = https::TaskState::running;
+    }
+    https::TaskState state() const override { return state_; }
+    std::optional<https::HTTPResponse> response() const override { return response_; }
+    void setResponse(https::HTTPResponse response) { response_ = std::move(response); }
+
+  private:
+    const bool canStart_;
+    https::TaskState state_ = https::TaskState::suspended;
+    std::optional<https::HTTPResponse> response_;
+};
+
+class KeptSession : public https::Session {
+  public:
+    std::shared_ptr<https::Task> dataTask(https::Request request, https::DataCompletion completion) override {
+        completion_ = std::move(completion);
+        return std::make_shared<KeptTask>(request);
+    }
+    std::shared_ptr<https::Task> downloadTask(https::Request request) override {
+        download_ = std::make_shared<KeptTask>(request);
+        return download_;
+    }
+    https::DataCompletion takeCompletion() { return std::exchange(completion_, nullptr); }
+    const std::shared_ptr<KeptTask>& download() const { return download_; }
+
+  private:
+    https::DataCompletion completion_;
+    std::shared_ptr<KeptTask> download_;
+};
+
+class KeptSessions : public https::SessionService {
+  public:
+    foundation::Result<std::shared_ptr<https::Session>> ephemeralSession(https::SessionDelegate&) override {
+        last_ = std::make_shared<KeptSession>();
+        return std::shared_ptr<https::Session>(last_);
+    }
+    const std::shared_ptr<KeptSession>& last() const { return last_; }
+
+  private:
+    std::shared_ptr<KeptSession> last_;
+};
+
+Platform withSessions(Platform platform, https::SessionService& sessions) {
+    return {platform.files,     platform.types,     platform.codeSigning,
+            platform.trust,     sessions,           platform.userDefaults,
+            platform.systemLog, platform.directory, [](int status) { throw RunEnded{status}; }};
+}
+
+// A download without an outcome must not pass for one that went well.
+foundation::Error missingAsset() {
+    return {foundation::kURLErrorDomain, static_cast<std::int64_t>(https::URLErrorCode::unknown),
+            "The large ticket was not fetched."};
+}
+
+Kind kindOf(const PWHashedFile& file) {
+    if (dynamic_cast<const PWHashedBundle*>(&file) != nullptr) return Kind::bundle;
+    if (dynamic_cast<const PWHashedDiskImage*>(&file) != nullptr) return Kind::diskImage;
+    if (dynamic_cast<const PWHashedFlatPackage*>(&file) != nullptr) return Kind::package;
+    return Kind::none;
+}
+
+// Whether the record says in due form that there is no ticket.
+bool hasNoTicket(const foundation::Data& body) {
+    const auto document = foundation::parseJSON(body);
+    try {
+        const TicketRecord record = ticketRecordOf(document ? *document : foundation::Value());
+        return record.ticketText() == nullptr && record.assetURLTemplate() == nullptr;
+    } catch (const foundation::ValueTypeError&) {
+        return false;
+    } catch (const std::out_of_range&) {
+        return false;
+    }
+}
+
+Cause causeOf(int status, const Answer& answer, const PWHashedFile& file) {
+    switch (status) {
+        case kExitOK:
+            return Cause::worked;
+        case kExitNoPermission:
+            return Cause::revoked;
+        case kExitCannotCreate:
+            return file.wasRefusedAsChanged() ? Cause::changed : Cause::notWritable;
+        case kExitNoHost:
+            return answer.kind == Answer::Kind::untrusted ? Cause::untrusted : Cause::unreachable;
+        case kExitNoInput:
+            return Cause::notReadable;
+        default:
+            return answer.kind == Answer::Kind::answered && hasNoTicket(answer.body) ? Cause::notIssued
+                                                                                     : Cause::notAcceptable;
+    }
+}
+
+// Why a run has ended before its lookup.
+Cause causeWithoutLookup(int status, PWHashedFile& file) {
+    switch (status) {
+        case kExitNoPermission:
+            return Cause::revoked;
+        case kExitNoInput:
+            return Cause::notSigned;
+        case kExitNoHost:
+            return Cause::unreachable;
+        default:
+            return file.ticketData() ? Cause::notAcceptable : Cause::notStapled;
+    }
+}
+
+}  // namespace
+
+struct ArtefactRun::Reading {
+    explicit Reading(const Platform& services) : platform(withSessions(services, sessions)) {}
+
+    KeptSessions sessions;
+    Platform platform;
+    std::shared_ptr<PWHashedFile> file;
+    std::unique_ptr<DownloadDelegate> controller;
+
+    // Of a bundle, whose hashed file does not note it.
+    std::optional<URL> executable;
+    std::optional<files::ItemState> executableState;
+};
+
+std::string_view nameOf(Kind kind) noexcept {
+    switch (kind) {
+        case Kind::none:
+            return "";
+        case Kind::bundle:
+            return "bundle";
+        case Kind::diskImage:
+            return "diskImage";
+        case Kind::package:
+            return "package";
+    }
+    return "";
+}
+
+ArtefactRun::ArtefactRun(std::string path, std::uint8_t operation, const Platform& platform)
+    : path_(std::move(path)), operation_(operation), platform_(platform) {}
+
+ArtefactRun::~ArtefactRun() = default;
+
+void ArtefactRun::release() {
+    reading_.reset();
+}
+
+std::optional<Outcome> ArtefactRun::begin() {
+    const MessageRedirection redirection([this](std::string line) { messages_.push_back(std::move(line)); });
+    return read();
+}
+
+std::optional<Outcome> ArtefactRun::read() {
+    messages_.clear();
+    recordName_.clear();
+    kind_ = Kind::none;
+    reading_ = std::make_unique<Reading>(platform_);
+    Reading& reading = *reading_;
+    const URL url = URL::fileURLWithPath(path_);
+
+    reading.file = PWHashedFile::initWithFileURL(url, reading.platform);
+    if (reading.file == nullptr) return Outcome{kExitNoInput, Cause::unsupported};
+    kind_ = kindOf(*reading.file);
+    if (const int status = reading.file->appropriateExitCode(); status != kExitOK)
+        return Outcome{status, Cause::notReadable};
+    if (kind_ == Kind::bundle) {
+        reading.executable = platform_.files.mainExecutableOfBundle(url);
+        if (reading.executable)
+            reading.executableState = platform_.files.stateOfItem(*reading.executable).asOptional();
+    }
+    if (const auto hash = reading.file->cdHash())
+        recordName_ = recordNameForHash(reading.file->digestAlgorithm(), *hash);
+
+    reading.controller = std::make_unique<DownloadDelegate>(reading.file, reading.platform);
+    reading.controller->setOperation(operation_);
+    try {
+        if (reading.controller->grabTicket()) return std::nullopt;
+    } catch (const RunEnded& ended) {
+        return Outcome{ended.status, causeWithoutLookup(ended.status, *reading.file)};
+    }
+    const int status = reading.file->appropriateExitCode();
+    return Outcome{status == kExitOK ? kExitNothingRecorded : status,
+                   causeWithoutLookup(status, *reading.file)};
+}
+
+std::optional<Outcome> ArtefactRun::end(const Answer& answer) {
+    const MessageRedirection redirection([this](std::string line) { messages_.push_back(std::move(line)); });
+    std::unique_ptr<files::ItemLock> lock;
+    if (operation_ == kOperationStaple && !lockArtefact(platform_, URL::fileURLWithPath(path_), lock))
+        return Outcome{kExitCannotCreate, Cause::notWritable};
+    if (!reading_ || !isAsRead()) {
+        const std::string asked = std::exchange(recordName_, {});
+        if (auto ended = read()) return ended;
+        if (recordName_ != asked) return std::nullopt;
+    }
+    return finish(answer);
+}
+
+bool ArtefactRun::isAsRead() const {
+    if (!reading_->file->isAsRead()) return false;
+    if (!reading_->executable || !reading_->executableState) return true;
+    return platform_.files.stateOfItem(*reading_->executable).asOptional() == reading_->executableState;
+}
+
+std::optional<Outcome> ArtefactRun::finish(const Answer& answer) {
+    messages_.insert(messages_.end(), answer.messages.begin(), answer.messages.end());
+    DownloadDelegate& controller = *reading_->controller;
+    const std::shared_ptr<KeptSession> lookup = reading_->sessions.last();
+    const https::DataCompletion complete = lookup->takeCompletion();
+    int status = kExitNoHost;
+    try {
+        if (answer.error && !answer.errorIsOfAsset) {
+            complete(std::nullopt, std::nullopt, answer.error);
+        } else {
+            complete(answer.body, answer.response, std::nullopt);
+        }
+        // Here a large ticket is to be downloaded: the controller has asked a session of its own.
+        const std::shared_ptr<KeptSession> session = reading_->sessions.last();
+        if (session != lookup && session->download() && answer.asset) {
+            session->download()->setResponse(answer.asset->response);
+            const URL location = platform_.files.temporaryDirectory().appendingPathComponent(
+                foundation::globallyUniqueString() + ".download");
+            static_cast<void>(platform_.files.writeFile(answer.asset->contents, location,
+                                                        files::FileManager::Writing::plain));
+            struct Removal {
+                files::FileManager& files;
+                const URL& file;
+                ~Removal() { static_cast<void>(files.removeItem(file)); }
+            } const removal{platform_.files, location};
+            controller.didFinishDownloading(*session, *session->download(), location);
+        } else if (session != lookup && session->download()) {
+            controller.didComplete(*session, *session->download(), answer.error.value_or(missingAsset()));
+            controller.notifyResult();
+        }
+    } catch (const RunEnded& ended) {
+        status = ended.status;
+    }
+    return Outcome{status, causeOf(status, answer, *controller.hashedFile())};
+}
+
+}  // namespace pinwell::retrieval

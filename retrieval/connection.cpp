@@ -1,0 +1,72 @@
+#include "retrieval/connection.h"
+
+#include <future>
+#include <utility>
+
+#include "src/DownloadDelegate.h"
+#include "src/messages.h"
+
+namespace pinwell::retrieval {
+namespace {
+
+foundation::Error cancelledError() {
+    return {foundation::kURLErrorDomain, static_cast<std::int64_t>(https::URLErrorCode::cancelled),
+            "The lookup was ended before its answer came."};
+}
+
+}  // namespace
+
+Exchange Connection::exchange(https::Request request, std::optional<Clock::time_point> deadline) {
+    std::promise<Exchange> ended;
+    std::future<Exchange> outcome = ended.get_future();
+    std::shared_ptr<https::Task> task;
+    {
+        const std::lock_guard lock(mutex_);
+        if (cancelled_) return {.error = cancelledError()};
+        if (!session_) {
+            auto session = platform_.https.ephemeralSession(*this);
+            if (!session) return {.error = session.error()};
+            session_ = *std::move(session);
+        }
+        serverWasRefused_ = false;
+        messages_.clear();
+        task = session_->dataTask(
+            std::move(request), [&ended](const auto& data, const auto& response, const auto& error) {
+                ended.set_value(
+                    {.response = response, .body = data.value_or(foundation::Data{}), .error = error});
+            });
+        task->resume();
+    }
+    if (deadline && outcome.wait_until(*deadline) == std::future_status::timeout) cancel();
+    Exchange result = outcome.get();
+    result.serverWasRefused = serverWasRefused_;
+    result.messages = std::exchange(messages_, {});
+    return result;
+}
+
+void Connection::cancel() {
+    std::shared_ptr<https::Session> session;
+    {
+        const std::lock_guard lock(mutex_);
+        cancelled_ = true;
+        session = std::move(session_);
+    }
+    session.reset();  // returns when the callbacks of a running task have
+}
+
+bool Connection::isCancelled() const {
+    const std::lock_guard lock(mutex_);
+    return cancelled_;
+}
+
+void Connection::didReceiveChallenge(https::Session&, const https::AuthenticationChallenge& challenge,
+                                     const https::ChallengeCompletion& completion) {
+    const MessageRedirection redirection([this](std::string line) { messages_.push_back(std::move(line)); });
+    answerServerChallenge(
+        challenge, [&](https::Disposition disposition, const std::optional<https::Credential>& credential) {
+            serverWasRefused_ = disposition != https::Disposition::useCredential;
+            completion(disposition, credential);
+        });
+}
+
+}  // namespace pinwell::retrieval

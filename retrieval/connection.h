@@ -1,0 +1,54 @@
+// One HTTPS session to the record service, used by one thread at a time and ended from any.
+#pragma once
+
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "https/session.h"
+#include "retrieval/retry_policy.h"
+#include "src/platform.h"
+
+namespace pinwell::retrieval {
+
+/// What came of one request.
+struct Exchange {
+    std::optional<https::HTTPResponse> response = {};
+    foundation::Data body = {};
+    std::optional<foundation::Error> error = {};
+    bool serverWasRefused = false;
+    std::vector<std::string> messages = {};  // of the server's judgement
+};
+
+class Connection : public https::SessionDelegate {
+  public:
+    explicit Connection(const Platform& platform) : platform_(platform) {}
+
+    /// Blocks until the answer is complete or has failed, or cancels at the deadline. The request must have a
+    /// URL.
+    Exchange exchange(https::Request request, std::optional<Clock::time_point> deadline);
+
+    /// Ends a running exchange with an error, and all later ones. From any thread but the session's own.
+    void cancel();
+    bool isCancelled() const;
+
+    void didReceiveChallenge(https::Session& session, const https::AuthenticationChallenge& challenge,
+                             const https::ChallengeCompletion& completion) override;
+    void didFinishDownloading(https::Session&, https::Task&, const foundation::URL&) override {}
+    void didComplete(https::Session&, https::Task&, const std::optional<foundation::Error>&) override {}
+
+  private:
+    Platform platform_;
+
+    // Written on the session's queue, read when the exchange is over.
+    bool serverWasRefused_ = false;
+    std::vector<std::string> messages_;
+
+    mutable std::mutex mutex_;
+    bool cancelled_ = false;
+    std::shared_ptr<https::Session> session_;  // last: it uses all of the above
+};
+
+}  // namespace pinwell::retrieval

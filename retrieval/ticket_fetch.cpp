@@ -1,0 +1,281 @@
+#include "retrieval/ticket_fetch.h"
+
+#include <algorithm>
+#include <map>
+#include <utility>
+
+#include "foundation/base64.h"
+#include "foundation/json.h"
+#include "src/PWHashedFile/PWHashedFile.h"
+#include "src/messages.h"
+#include "src/ticket_record.h"
+#include "src/ticket_verdict.h"
+
+namespace pinwell::retrieval {
+namespace {
+
+constexpr std::size_t kShortestHash = 20;
+constexpr std::size_t kLongestHash = 64;
+constexpr std::size_t kMostAlgorithmDigits = 10;  // of 32 bits
+
+struct Pending {
+    std::size_t index = 0;  // of the name
+    FetchedTicket result;
+    unsigned failures = 0;  // tries that came to nothing
+    unsigned polls = 0;     // answers that it is not issued yet
+    Clock::time_point begun;
+    std::optional<Clock::time_point> notIssuedSince;
+};
+
+std::optional<std::uint8_t> nibble(char digit) {
+    if (digit >= '0' && digit <= '9') return static_cast<std::uint8_t>(digit - '0');
+    if (digit >= 'a' && digit <= 'f') return static_cast<std::uint8_t>(digit - 'a' + 10);
+    return std::nullopt;
+}
+
+std::optional<foundation::Data> bytesOfHex(std::string_view digits) {
+    if (digits.size() % 2 != 0) return std::nullopt;
+    foundation::Data bytes;
+    for (std::size_t i = 0; i < digits.size(); i += 2) {
+        const auto high = nibble(digits[i]);
+        const auto low = nibble(digits[i + 1]);
+        if (!high || !low) return std::nullopt;
+        bytes.push_back(std::byte(static_cast<std::uint8_t>(*high << 4U | *low)));
+    }
+    return bytes;
+}
+
+void fail(FetchedTicket& result, Cause cause, int status, std::string message) {
+    result.cause = cause;
+    result.exitStatus = status;
+    result.messages.push_back(std::move(message));
+}
+
+// The ticket in a record that was answered.
+void takeTicket(const Answer& answer, FetchedTicket& result, const Platform& platform) {
+    const auto document = foundation::parseJSON(answer.body);
+    std::optional<foundation::Data> ticket;
+    try {
+        const TicketRecord record = ticketRecordOf(document ? *document : foundation::Value());
+        if (const std::string* const text = record.ticketText()) {
+            ticket = foundation::decodeBase64(*text);
+        } else if (record.assetURLTemplate() == nullptr) {
+            fail(result, Cause::notIssued, kExitDataError,
+                 foundation::format("Lumora query for %@ failed due to \"%@\".", result.recordName,
+                                    record.reason));
+            return;
+        } else if (answer.asset) {
+            switch (faultOfAsset(record.assetSize, answer.asset->contents.size(), answer.asset->response)) {
+                case AssetFault::length:
+                    fail(result, Cause::notAcceptable, kExitDataError,
+                         foundation::format(
+                             "We were expecting a ticket size of %@ but download a ticket of size %lu",
+                             record.assetSize, answer.asset->contents.size()));
+                    return;
+                case AssetFault::status:
+                    fail(result, Cause::unreachable, kExitNoHost,
+                         foundation::format(
+                             "Attempting to download larger ticket for %@ failed. %@", result.recordName,
+                             https::localizedStringForStatusCode(answer.asset->response.status)));
+                    return;
+                case AssetFault::none:
+                    break;
+            }
+            ticket = answer.asset->contents;
+        }
+    } catch (const foundation::ValueTypeError&) {
+        fail(result, Cause::notAcceptable, kExitDataError,
+             foundation::format("Lumora query for %@ did not return expected JSON data.", result.recordName));
+        return;
+    } catch (const std::out_of_range&) {
+        fail(result, Cause::notAcceptable, kExitDataError,
+             foundation::format("Lumora query for %@ did not return expected JSON data.", result.recordName));
+        return;
+    }
+    const auto verdict = judgeTicket(
+        ticket, [&] { return hashInRecordName(result.recordName); }, platform.trust);
+    switch (verdict) {
+        case TicketVerdict::acceptable:
+            result.cause = Cause::worked;
+            result.exitStatus = kExitOK;
+            result.ticket = *std::move(ticket);
+            return;
+        case TicketVerdict::revoked:
+            fail(result, Cause::revoked, kExitNoPermission,
+                 foundation::format(
+                     "The ticket for %@ has been revoked. Tollmark will prevent it from running.",
+                     result.recordName));
+            result.ticket = *std::move(ticket);
+            return;
+        case TicketVerdict::refused:
+            fail(result, Cause::notAcceptable, kExitDataError,
+                 foundation::format("Could not validate ticket for %@", result.recordName));
+            return;
+    }
+}
+
+void takeAnswer(const Answer& answer, FetchedTicket& result, const Platform& platform) {
+    ++result.attempts;
+    result.messages = answer.messages;
+    result.ticket.clear();
+    if (answer.error) {
+        fail(result, answer.kind == Answer::Kind::untrusted ? Cause::untrusted : Cause::unreachable,
+             kExitNoHost, foundation::format("error is %@", answer.error));
+        return;
+    }
+    if (answer.body.empty()) {
+        fail(result, Cause::unreachable, kExitNoHost,
+             foundation::format("Lumora's response is inconsistent with expections: %@", answer.response));
+        return;
+    }
+    takeTicket(answer, result, platform);
+}
+
+class Fetch {
+  public:
+    Fetch(const std::vector<std::string>& names, const FetchOptions& options, const Platform& platform,
+          Cancellation& cancellation, const TakeFetched& take)
+        : names_(names),
+          options_(options),
+          platform_(platform),
+          cancellation_(cancellation),
+          take_(take),
+          service_(platform) {}
+
+    void run() {
+        while (next_ < names_.size() || !waiting_.empty()) {
+            if (next_ == names_.size() && !sleepUntilDue()) break;
+            if (cancellation_.isCancelled() || isLate()) break;
+            lookUp(takeDue());
+        }
+        const Cause why = isLate() ? Cause::timedOut : Cause::interrupted;
+        for (auto& [due, left] : waiting_) endUndone(left, why);
+        while (next_ < names_.size()) {
+            Pending fresh = begin(next_++);
+            endUndone(fresh, why);
+        }
+    }
+
+  private:
+    bool isLate() const { return options_.deadline && Clock::now() >= *options_.deadline; }
+
+    bool sleepUntilDue() {
+        auto due = waiting_.begin()->first;
+        if (options_.deadline) due = std::min(due, *options_.deadline);
+        return !cancellation_.sleepUntil(due);
+    }
+
+    Pending begin(std::size_t index) const {
+        Pending pending;
+        pending.index = index;
+        pending.result.recordName = names_[index];
+        pending.begun = Clock::now();
+        return pending;
+    }
+
+    // What is due first, and names that were not asked for yet in the places that are left.
+    std::vector<Pending> takeDue() {
+        std::vector<Pending> group;
+        const auto now = Clock::now();
+        while (group.size() < kNamesPerRequest && !waiting_.empty() && waiting_.begin()->first <= now)
+            group.push_back(std::move(waiting_.extract(waiting_.begin()).mapped()));
+        while (group.size() < kNamesPerRequest && next_ < names_.size()) {
+            Pending fresh = begin(next_++);
+            if (hashInRecordName(fresh.result.recordName)) {
+                group.push_back(std::move(fresh));
+                continue;
+            }
+            fail(fresh.result, Cause::notIssued, kExitDataError,
+                 foundation::format("%@ is not the name of a record.", fresh.result.recordName));
+            end(fresh);
+        }
+        return group;
+    }
+
+    void lookUp(std::vector<Pending> group) {
+        std::vector<std::string> names;
+        for (const Pending& pending : group) names.push_back(pending.result.recordName);
+        const std::vector<Answer> answers = service_.lookUp(names, cancellation_, options_.deadline);
+        const double chance = randomChance();  // one for all, so that they stay a group
+        for (std::size_t i = 0; i < group.size(); ++i) {
+            const auto due = takeAnswerOf(group[i], answers[i], chance);
+            if (due)
+                waiting_.emplace(*due, std::move(group[i]));
+            else
+                end(group[i]);
+        }
+    }
+
+    // When to ask again; `nullopt` if it has ended.
+    std::optional<Clock::time_point> takeAnswerOf(Pending& pending, const Answer& answer, double chance) {
+        const auto now = Clock::now();
+        takeAnswer(answer, pending.result, platform_);
+        if (answer.error && (cancellation_.isCancelled() || isLate())) return now;  // run() says why
+        if (isCurable(pending.result.cause) && pending.failures++ < options_.retry.retries)
+            return now + options_.retry.delayAfter(pending.failures, answer.retryAfter, chance);
+        if (pending.result.cause != Cause::notIssued || options_.wait.count() <= 0) return std::nullopt;
+        if (!pending.notIssuedSince) pending.notIssuedSince = now;
+        const auto last =
+            *pending.notIssuedSince + std::chrono::duration_cast<Clock::duration>(options_.wait);
+        if (now >= last) return std::nullopt;
+        return std::min(now + options_.retry.pollDelayAfter(++pending.polls, chance), last);
+    }
+
+    void endUndone(Pending& pending, Cause why) {
+        pending.result.cause = why;
+        pending.result.exitStatus = kExitNoHost;
+        end(pending);
+    }
+
+    void end(Pending& pending) {
+        pending.result.seconds = std::chrono::duration<double>(Clock::now() - pending.begun).count();
+        take_(pending.index, std::move(pending.result));
+    }
+
+    const std::vector<std::string>& names_;
+    const FetchOptions& options_;
+    const Platform& platform_;
+    Cancellation& cancellation_;
+    const TakeFetched& take_;
+    RecordService service_;
+    std::size_t next_ = 0;                               // of the names that were not asked for yet
+    std::multimap<Clock::time_point, Pending> waiting_;  // by when they are due
+};
+
+}  // namespace
+
+std::optional<foundation::Data> hashInRecordName(std::string_view name) {
+    if (name.starts_with("1/")) {
+        name.remove_prefix(2);
+    } else if (name.starts_with("2/")) {
+        name.remove_prefix(2);
+        const std::size_t slash = name.find('/');
+        if (slash == std::string_view::npos || slash == 0 || slash > kMostAlgorithmDigits)
+            return std::nullopt;
+        const std::string_view algorithm = name.substr(0, slash);
+        const bool isNumber = std::all_of(algorithm.begin(), algorithm.end(),
+                                          [](char digit) { return digit >= '0' && digit <= '9'; });
+        if (!isNumber || algorithm.front() == '0') return std::nullopt;
+        name.remove_prefix(slash + 1);
+    } else {
+        return std::nullopt;
+    }
+    if (name.size() < 2 * kShortestHash || name.size() > 2 * kLongestHash) return std::nullopt;
+    return bytesOfHex(name);
+}
+
+void fetchTickets(const std::vector<std::string>& names, const FetchOptions& options,
+                  const Platform& platform, Cancellation& cancellation, const TakeFetched& take) {
+    Fetch(names, options, platform, cancellation, take).run();
+}
+
+std::vector<FetchedTicket> fetchTickets(const std::vector<std::string>& names, const FetchOptions& options,
+                                        const Platform& platform) {
+    std::vector<FetchedTicket> fetched(names.size());
+    Cancellation cancellation;
+    fetchTickets(names, options, platform, cancellation,
+                 [&](std::size_t index, FetchedTicket ticket) { fetched[index] = std::move(ticket); });
+    return fetched;
+}
+
+}  // namespace pinwell::retrieval

@@ -1,0 +1,64 @@
+// Tickets by the names of their records, without any artefact: fetched online, judged, with the cause of each
+// that could not be had.
+//
+//   const HostPlatform host(...);
+//   for (const FetchedTicket& one : fetchTickets({"2/2/0a1b..."}, {}, host.services()))
+//       if (one.cause == Cause::worked) use(one.ticket);
+#pragma once
+
+#include <functional>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "retrieval/cause.h"
+#include "retrieval/record_service.h"
+#include "retrieval/retry_policy.h"
+#include "src/platform.h"
+
+namespace pinwell::retrieval {
+
+struct FetchOptions {
+    RetryPolicy retry;
+
+    /// How long to go on asking for what is not issued yet. Counts from the first answer that says so.
+    std::chrono::duration<double> wait{0};
+
+    /// When all must be over; what is not, is timedOut.
+    std::optional<Clock::time_point> deadline;
+};
+
+struct FetchedTicket {
+    std::string recordName;
+    Cause cause = Cause::unreachable;
+    int exitStatus = 0;     // as `pinwell` would have ended
+    unsigned attempts = 0;  // lookups that named the record
+    double seconds = 0;     // from the first lookup to the end
+
+    /// The ticket's bytes: genuine, and listing the hash of the record's name (worked), or genuine and
+    /// marking the software as revoked (revoked). Empty otherwise.
+    foundation::Data ticket;
+
+    /// For the user: why there is none.
+    std::vector<std::string> messages;
+};
+
+/// The hash in the name of a record: "2/ALGORITHM/HEX" or "1/HEX", the digits in lower case, 20 to 64 bytes
+/// of hash. `nullopt` if it is no such name.
+std::optional<foundation::Data> hashInRecordName(std::string_view name);
+
+/// Gets each ticket as it ends, with the index of its name.
+using TakeFetched = std::function<void(std::size_t index, FetchedTicket ticket)>;
+
+/// Fetches these tickets and hands each one out as it ends, on the calling thread. Blocks. A name that is
+/// none of a record ends as notIssued without being asked for. `cancellation` ends all that is not done, as
+/// `interrupted`; the deadline does so as `timedOut`.
+void fetchTickets(const std::vector<std::string>& names, const FetchOptions& options,
+                  const Platform& platform, Cancellation& cancellation, const TakeFetched& take);
+
+/// The same, all at once, in the order of the names.
+std::vector<FetchedTicket> fetchTickets(const std::vector<std::string>& names, const FetchOptions& options,
+                                        const Platform& platform);
+
+}  // namespace pinwell::retrieval
