@@ -21,8 +21,7 @@ namespace {
 using foundation::FileDescriptor;
 using foundation::format;
 
-constexpr int kBacklog = 128;
-constexpr int kPauseWhenShortMilliseconds = 50;
+constexpr int kBacklog = 1024;  // the kernel cuts it to its own limit
 
 using AddressList = foundation::Handle<addrinfo, ::freeaddrinfo>;
 
@@ -83,26 +82,6 @@ Listener::Listener(const Endpoint& endpoint) : endpoint_(endpoint) {
     if (::getsockname(socket_.get(), reinterpret_cast<sockaddr*>(&bound), &length) == 0) {
         endpoint_.port = endpointOf(bound, length).port;
     }
-}
-
-FileDescriptor Listener::accept() {
-    FileDescriptor connection(::accept4(socket_.get(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
-    if (!connection && (errno == EMFILE || errno == ENFILE || errno == ENOBUFS || errno == ENOMEM)) {
-        ::poll(nullptr, 0, kPauseWhenShortMilliseconds);
-    }
-    if (connection) {
-        const int yes = 1;
-        ::setsockopt(connection.get(), IPPROTO_TCP, TCP_NODELAY, &yes, sizeof yes);
-    }
-    return connection;
-}
-
-std::string peerOf(int socket) {
-    sockaddr_storage address{};
-    socklen_t length = sizeof address;
-    if (::getpeername(socket, reinterpret_cast<sockaddr*>(&address), &length) != 0) return "-";
-    const Endpoint endpoint = endpointOf(address, length);
-    return endpoint.host.empty() ? "-" : toString(endpoint);
 }
 
 }  // namespace pinwell::lumora

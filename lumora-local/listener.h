@@ -1,8 +1,6 @@
 // A listening TCP socket.
 #pragma once
 
-#include <optional>
-
 #include "foundation/file_io.h"
 #include "lumora-local/endpoint.h"
 
@@ -18,21 +16,15 @@ class Listener {
     /// The host as it was asked for, with the port that was bound.
     const Endpoint& endpoint() const noexcept { return endpoint_; }
 
-    /// The next connection. Nothing when there is none after all, or the system cannot serve one right now
-    /// (after a short pause, since the cause may be a lack of descriptors).
-    foundation::FileDescriptor accept();
-
+    /// Non-blocking; the listener keeps it until release().
     int descriptor() const noexcept { return socket_.get(); }
 
-    /// Refuses further connections.
-    void close() noexcept { socket_.reset(); }
+    /// Hands the socket to the caller.
+    foundation::FileDescriptor release() noexcept { return std::move(socket_); }
 
   private:
     Endpoint endpoint_;
     foundation::FileDescriptor socket_;
 };
-
-/// "ADDRESS:PORT" of the other end, "-" when it cannot be told.
-std::string peerOf(int socket);
 
 }  // namespace pinwell::lumora

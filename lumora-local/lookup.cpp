@@ -1,6 +1,7 @@
 #include "lumora-local/lookup.h"
 
 #include <algorithm>
+#include <unordered_map>
 
 #include "foundation/base64.h"
 #include "foundation/format.h"
@@ -128,6 +129,14 @@ Value foundRecord(const std::string& name, std::string field, const char* type, 
     return Dictionary{{"recordName", name}, {"recordType", "SignedTicket"}, {"fields", std::move(fields)}};
 }
 
+/// Bytes that a record takes in an answer, at most: its name six times as long when every character is
+/// escaped.
+std::size_t sizeInAnswer(const std::string& name, const std::optional<Delivery>& delivery) {
+    constexpr std::size_t kFrame = 512;
+    const std::size_t ticket = delivery && delivery->inlineTicket ? delivery->inlineTicket->size() : 0;
+    return kFrame + 6 * name.size() + (ticket + 2) / 3 * 4;
+}
+
 }  // namespace
 
 Answer refusal(int status, std::string_view code, std::string_view reason) {
@@ -158,9 +167,21 @@ Answer LookupService::answerLookup(const RequestHead& head, std::string_view bod
     if (!environment) return notFound();
     LookupBody request = parseLookupBody(body);
     if (request.refused) return *std::move(request.refused);
+    // A name that comes again is looked up once. What the answer costs is known before it is put together.
+    std::unordered_map<std::string, std::optional<Delivery>> found;
+    std::size_t size = 0;
+    for (const std::string& name : request.names) {
+        auto [entry, fresh] = found.try_emplace(name);
+        if (fresh) entry->second = source_.findTicket(*environment, name);
+        size += sizeInAnswer(name, entry->second);
+        if (size > kMaximumAnswerSize) {
+            return refusal(413, "ANSWER_TOO_LARGE",
+                           "The answer would be too large; ask for fewer records at once");
+        }
+    }
     Array records;
     for (const std::string& name : request.names) {
-        const std::optional<Delivery> delivery = source_.findTicket(*environment, name);
+        const std::optional<Delivery>& delivery = found.at(name);
         if (delivery && delivery->inlineTicket) {
             records.push_back(foundRecord(name, "signedTicket", "BYTES",
                                           foundation::encodeBase64(*delivery->inlineTicket)));
@@ -179,12 +200,28 @@ Answer LookupService::answerLookup(const RequestHead& head, std::string_view bod
 
 Answer LookupService::answerAsset(std::string_view path) const {
     const std::optional<std::string> identifier = assetIdentifier(path);
-    const std::optional<Data> ticket = identifier ? source_.findAsset(*identifier) : std::nullopt;
-    if (!ticket) return notFound();
+    std::shared_ptr<const Data> ticket = identifier ? sharedAsset(*identifier) : nullptr;
+    if (ticket == nullptr) return notFound();
     Answer answer;
     answer.contentType = "application/octet-stream";
-    answer.body = foundation::toString(*ticket);
+    answer.asset = std::move(ticket);
     return answer;
+}
+
+std::shared_ptr<const Data> LookupService::sharedAsset(const std::string& identifier) const {
+    // The record decides whether there is such an asset; bytes that are on their way to somebody are used
+    // again.
+    std::optional<Data> ticket = source_.findAsset(identifier);
+    if (!ticket) return nullptr;
+    const std::lock_guard lock(assetsMutex_);
+    std::erase_if(assets_, [](const auto& entry) { return entry.second.expired(); });
+    std::weak_ptr<const Data>& known = assets_[identifier];
+    std::shared_ptr<const Data> shared = known.lock();
+    if (shared == nullptr) {
+        shared = std::make_shared<const Data>(*std::move(ticket));
+        known = shared;
+    }
+    return shared;
 }
 
 Answer LookupService::answerHealth() const {

@@ -13,9 +13,12 @@
 // Every refusal is a JSON object {"serverErrorCode": C, "reason": R} with a 4xx or 5xx status.
 #pragma once
 
+#include <memory>
+#include <mutex>
 #include <optional>
 #include <string>
 #include <string_view>
+#include <unordered_map>
 #include <utility>
 #include <vector>
 
@@ -28,6 +31,9 @@ inline constexpr std::string_view kContainer = "com.ostrel.tm.ticket-delivery";
 inline constexpr std::size_t kMaximumBodySize = 1024 * 1024;
 inline constexpr std::size_t kMaximumRecordsPerRequest = 200;
 inline constexpr std::size_t kMaximumRecordNameLength = 255;
+
+/// A lookup whose answer would be longer is refused: its client asks for fewer records at a time.
+inline constexpr std::size_t kMaximumAnswerSize = 8 * 1024 * 1024;
 
 /// A request up to its body. `target` is as it stood in the request line; header values are empty when
 /// absent.
@@ -43,6 +49,8 @@ struct Answer {
     int status = 200;
     std::string contentType = "application/json";
     std::string body;
+    std::shared_ptr<const foundation::Data>
+        asset;  // in the place of `body`; downloads of one ticket share it
     std::vector<std::pair<std::string, std::string>> headers;
 };
 
@@ -65,12 +73,15 @@ class LookupService {
 
   private:
     Answer answerAsset(std::string_view path) const;
+    std::shared_ptr<const foundation::Data> sharedAsset(const std::string& identifier) const;
     Answer answerHealth() const;
     std::string assetUrlTemplate(const RequestHead& head, const std::string& identifier) const;
 
     RecordSource& source_;
     std::vector<std::string> hosts_;
     Endpoint fallback_;
+    mutable std::mutex assetsMutex_;
+    mutable std::unordered_map<std::string, std::weak_ptr<const foundation::Data>> assets_;  // being sent
 };
 
 }  // namespace pinwell::lumora

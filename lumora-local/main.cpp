@@ -200,7 +200,7 @@ void runServe(const Arguments& arguments) {
     if (!arguments.readyFile.empty()) options.readyFile = arguments.readyFile;
     options.updatePlatform = arguments.updatePlatform;
 
-    const foundation::FileDescriptor stop = stopOnSignals();
+    const ServeSignals signals = catchServeSignals();
     std::mutex mutex;
     const ServeOutput output{.out =
                                  [&](std::string_view line) {
@@ -212,7 +212,7 @@ void runServe(const Arguments& arguments) {
                                      const std::lock_guard lock(mutex);
                                      complain(line);
                                  }};
-    serve(openService(arguments), options, output, stop.get());
+    serve(openService(arguments), options, output, signals);
 }
 
 constexpr const char* kServiceHelp = "The service (default: $LUMORA_DIR)";

@@ -2,10 +2,12 @@
 
 #include <pthread.h>
 #include <signal.h>
+#include <sys/resource.h>
 #include <sys/signalfd.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <initializer_list>
 
 #include "foundation/format.h"
 #include "lumora-local/failure.h"
@@ -43,32 +45,69 @@ void announce(const ServiceDirectory& directory, const ServeOptions& options, co
     if (options.readyFile) replaceFile(*options.readyFile, foundation::asBytes(url + "\n"), 0644);
 }
 
-}  // namespace
-
-foundation::FileDescriptor stopOnSignals() {
+foundation::FileDescriptor waitForSignals(std::initializer_list<int> numbers) {
     sigset_t signals;
     sigemptyset(&signals);
-    sigaddset(&signals, SIGTERM);
-    sigaddset(&signals, SIGINT);
+    for (const int number : numbers) sigaddset(&signals, number);
     if (::pthread_sigmask(SIG_BLOCK, &signals, nullptr) != 0) throw Failure(EX_OSERR, "cannot block signals");
     foundation::FileDescriptor descriptor(::signalfd(-1, &signals, SFD_CLOEXEC | SFD_NONBLOCK));
     if (!descriptor) throw Failure(EX_OSERR, "cannot wait for signals");
     return descriptor;
 }
 
+/// Takes the signals that have come.
+void takeSignals(int descriptor) {
+    signalfd_siginfo information{};
+    while (::read(descriptor, &information, sizeof information) == sizeof information) continue;
+}
+
+void reload(TlsContext& tls, const ServeOutput& output) {
+    try {
+        tls.reload();
+        output.out("read the certificate and the key again");
+    } catch (const Failure& failure) {
+        output.err(format("%s; the service goes on with the certificate that it has", failure.what()));
+    }
+}
+
+/// As many descriptors as the system lets this process have, and how many of them may be connections.
+std::size_t connectionsThatFit() {
+    constexpr rlim_t kForEverythingElse = 64;
+    rlimit limit{};
+    if (::getrlimit(RLIMIT_NOFILE, &limit) != 0) return ServerLimits{}.connections;
+    limit.rlim_cur = limit.rlim_max;
+    ::setrlimit(RLIMIT_NOFILE, &limit);
+    ::getrlimit(RLIMIT_NOFILE, &limit);
+    const rlim_t fitting =
+        limit.rlim_cur > 2 * kForEverythingElse ? limit.rlim_cur - kForEverythingElse : kForEverythingElse;
+    return std::min<std::size_t>(ServerLimits{}.connections, fitting);
+}
+
+}  // namespace
+
+ServeSignals catchServeSignals() {
+    return {waitForSignals({SIGTERM, SIGINT}), waitForSignals({SIGHUP})};
+}
+
 void serve(const ServiceDirectory& directory, const ServeOptions& options, const ServeOutput& output,
-           int stopDescriptor) {
+           const ServeSignals& signals) {
     // A file that an earlier run left would tell of a service that is not there yet.
     if (options.readyFile) ::unlink(options.readyFile->c_str());
-    const TlsContext tls(directory.serverCertificatePath(), directory.serverKeyPath());
+    TlsContext tls(directory.serverCertificatePath(), directory.serverKeyPath());
     SqliteStore store(directory.storePath());
     Listener listener(options.listen ? *options.listen : directory.advertisedEndpoint());
     const Endpoint endpoint = reachable(directory, listener.endpoint());
     announce(directory, options, output, endpoint);
 
     const LookupService lookups(store, directory.hosts(), endpoint);
-    Server server(lookups, tls, output.out, output.err);
-    server.run(listener, stopDescriptor);
+    ServerLimits limits;
+    limits.connections = connectionsThatFit();
+    Server server(lookups, tls, output.out, output.err, limits);
+    const int hangUp = signals.reload.get();
+    server.run(listener, signals.stop.get(), {{hangUp, [&tls, &output, hangUp] {
+                                                   takeSignals(hangUp);
+                                                   reload(tls, output);
+                                               }}});
     output.out("stopped");
 }
 

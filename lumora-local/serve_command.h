@@ -25,13 +25,19 @@ struct ServeOutput {
     std::function<void(std::string_view)> err;  // what went wrong, or will
 };
 
-/// Blocks SIGTERM and SIGINT for the calling thread and the threads it starts from now on; answers a
-/// descriptor that becomes readable when one of them arrives. Call it before any other thread exists. Throws
-/// Failure.
-foundation::FileDescriptor stopOnSignals();
+/// Descriptors that become readable when signals arrive.
+struct ServeSignals {
+    foundation::FileDescriptor stop;    // SIGTERM, SIGINT
+    foundation::FileDescriptor reload;  // SIGHUP
+};
 
-/// Serves until `stopDescriptor` is readable. Throws Failure when it cannot begin.
+/// Blocks the signals for the calling thread and the threads that it starts from now on. Call it before any
+/// other thread exists. Throws Failure.
+ServeSignals catchServeSignals();
+
+/// Serves until it is asked to stop; SIGHUP makes it read the certificate and the key again. Throws Failure
+/// when it cannot begin.
 void serve(const ServiceDirectory& directory, const ServeOptions& options, const ServeOutput& output,
-           int stopDescriptor);
+           const ServeSignals& signals);
 
 }  // namespace pinwell::lumora

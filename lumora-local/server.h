@@ -4,21 +4,29 @@
 #include <chrono>
 #include <functional>
 #include <string_view>
+#include <vector>
 
 #include "lumora-local/listener.h"
 #include "lumora-local/lookup.h"
-#include "lumora-local/tls_connection.h"
+#include "lumora-local/tls_context.h"
 
 namespace pinwell::lumora {
 
 struct ServerLimits {
-    std::size_t workers = 16;
-    std::size_t connections = 256;  // accepted and not yet closed; more wait in the kernel's queue
+    std::size_t workers = 0;                  // threads; 0: one for each processor, and at least four
+    std::size_t connections = 16 * 1024;      // accepted and not yet closed; more wait in the kernel's queue
+    std::size_t connectionsPerAddress = 256;  // beyond it, the peer's oldest silent connection makes room
     std::size_t requestsPerConnection = 1000;
     std::size_t headBytes = 64 * 1024;  // request line and headers, over all of them
     std::chrono::milliseconds handshakeTime{10'000};
     std::chrono::milliseconds idleTime{5'000};
     std::chrono::milliseconds requestTime{30'000};
+};
+
+/// Something to do while serving, whenever a descriptor becomes readable.
+struct Watch {
+    int descriptor = -1;
+    std::function<void()> react;  // reads what is there; from any worker, one call at a time
 };
 
 class Server {
@@ -31,8 +39,9 @@ class Server {
            const ServerLimits& limits = {});
 
     /// Serves until `stopDescriptor` is readable (which nobody may undo), then refuses new connections, lets
-    /// the requests that have begun finish, closes the idle connections, and returns.
-    void run(Listener& listener, int stopDescriptor);
+    /// the requests that have begun finish, closes the silent connections, and returns. Takes the listener's
+    /// socket.
+    void run(Listener& listener, int stopDescriptor, const std::vector<Watch>& watches = {});
 
   private:
     const LookupService& lookups_;

@@ -27,6 +27,8 @@ class FakeRecords final : public RecordSource {
             return name == "in-development" ? std::optional(Delivery{foundation::toData("dev"), {}})
                                             : std::nullopt;
         }
+        ++lookups;
+        if (name == "mebibyte") return Delivery{Data(1024 * 1024), {}};
         if (name == "inline") return Delivery{foundation::toData("ticket"), {}};
         if (name == "large") return Delivery{{}, Delivery::Asset{kAsset, 2'000'000}};
         return std::nullopt;
@@ -38,6 +40,7 @@ class FakeRecords final : public RecordSource {
     std::size_t countRecords() override { return 2; }
 
     bool failing = false;
+    int lookups = 0;
 };
 
 class LookupTest : public testing::Test {
@@ -103,6 +106,36 @@ TEST_F(LookupTest, AnswersSeveralRecordsInTheOrderAskedFor) {
     EXPECT_EQ(*records[1]["recordName"].string(), "inline");
     EXPECT_EQ(*records[2]["recordName"].string(), "large");
     EXPECT_EQ(*records[3]["recordName"].string(), "inline");
+}
+
+std::string bodyOf(const std::string& name, std::size_t times) {
+    std::string records;
+    for (std::size_t i = 0; i < times; ++i)
+        records += (i > 0 ? "," : "") + ("{\"recordName\":\"" + name + "\"}");
+    return "{\"records\":[" + records + "]}";
+}
+
+TEST_F(LookupTest, LooksUpANameOnceHoweverOftenItComes) {
+    const Value answer = lookup(bodyOf("inline", 200));
+    EXPECT_EQ(answer["records"].array()->size(), 200U);
+    EXPECT_EQ(records_.lookups, 1);
+}
+
+TEST_F(LookupTest, RefusesAnAnswerOverItsLimit) {
+    EXPECT_EQ(bodyStatus(bodyOf("mebibyte", 5)), 200);
+    EXPECT_EQ(bodyStatus(bodyOf("mebibyte", 6)), 413);
+    EXPECT_EQ(bodyStatus(bodyOf("mebibyte", 200)), 413);
+}
+
+TEST_F(LookupTest, KeepsItsLimitToTheByteOfWhatIsSent) {
+    EXPECT_LE(service_.answerLookup(lookupHead(), bodyOf("mebibyte", 5)).body.size(), kMaximumAnswerSize);
+}
+
+TEST_F(LookupTest, SharesTheBytesOfAnAssetThatSeveralDownload) {
+    const RequestHead head{"GET", "/assets/" + kAsset + "/x", "", "", ""};
+    const auto first = service_.answerHead(head);
+    const auto second = service_.answerHead(head);
+    EXPECT_EQ(first->asset, second->asset);
 }
 
 TEST_F(LookupTest, KeepsTheEnvironmentsApart) {
@@ -243,7 +276,8 @@ TEST_F(LookupTest, ServesAnAssetUnderAnyPlainName) {
         const auto answer = service_.answerHead({"GET", "/assets/" + kAsset + "/" + name, "", "", ""});
         ASSERT_TRUE(answer);
         EXPECT_EQ(answer->status, 200) << name;
-        EXPECT_EQ(answer->body, std::string("bytes\0of\xFFit", 11));
+        ASSERT_NE(answer->asset, nullptr);
+        EXPECT_EQ(*answer->asset, foundation::toData(std::string("bytes\0of\xFFit", 11)));
         EXPECT_EQ(answer->contentType, "application/octet-stream");
     }
 }

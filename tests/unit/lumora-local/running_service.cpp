@@ -191,6 +191,15 @@ std::string RawClient::readUntil(const std::string& mark, std::size_t count) {
     return all;
 }
 
+std::string RawClient::serverCertificate() const {
+    X509* certificate = SSL_get1_peer_certificate(connection_->ssl);
+    std::string der(static_cast<std::size_t>(i2d_X509(certificate, nullptr)), '\0');
+    auto* end = reinterpret_cast<unsigned char*>(der.data());
+    i2d_X509(certificate, &end);
+    X509_free(certificate);
+    return der;
+}
+
 void RawClient::drop() {
     connection_->socket.reset();
 }

@@ -79,6 +79,9 @@ class RawClient {
     /// Everything up to the `count`-th empty line: that many heads of answers without bodies, say.
     std::string readUntil(const std::string& mark, std::size_t count = 1);
 
+    /// The certificate that the service shows, in DER.
+    std::string serverCertificate() const;
+
     /// Ends the TCP connection without a word of TLS.
     void drop();
 

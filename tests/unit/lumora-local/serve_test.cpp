@@ -3,6 +3,7 @@
 #include <signal.h>
 
 #include <atomic>
+#include <filesystem>
 #include <set>
 #include <thread>
 
@@ -204,6 +205,35 @@ TEST(Serve, FinishesARequestThatHasBegunBeforeItStops) {
     const std::string answer = client.readToEnd();
     EXPECT_EQ(answer.substr(0, 15), "HTTP/1.1 200 OK") << answer;
     EXPECT_NE(answer.find("Record not found"), std::string::npos);
+    EXPECT_EQ(service.wait(), 0);
+}
+
+std::string certificateOf(const RunningService& service) {
+    return RawClient(service).serverCertificate();
+}
+
+TEST(Serve, ReadsItsCertificateAgainOnHangUp) {
+    RunningService service;
+    RunningService other;
+    const std::string before = certificateOf(service);
+    for (const char* file : {"/service/server.pem", "/service/server.key"}) {
+        std::filesystem::copy_file(other.path() + file, service.path() + file,
+                                   std::filesystem::copy_options::overwrite_existing);
+    }
+    service.sendSignal(SIGHUP);
+    while (service.output().find("again") == std::string::npos) std::this_thread::yield();
+    EXPECT_NE(certificateOf(service), before);
+    EXPECT_EQ(certificateOf(service), certificateOf(other));
+}
+
+TEST(Serve, KeepsItsCertificateWhenTheNewOneCannotBeUsed) {
+    RunningService service;
+    const std::string before = certificateOf(service);
+    pinwell::test::writeFile(service.path() + "/service/server.pem", "no certificate");
+    for (int i = 0; i < 3; ++i) service.sendSignal(SIGHUP);
+    while (service.errors().find("goes on") == std::string::npos) std::this_thread::yield();
+    EXPECT_EQ(certificateOf(service), before);
+    service.sendSignal(SIGTERM);
     EXPECT_EQ(service.wait(), 0);
 }
 

@@ -1,13 +1,17 @@
 // What the server does when its limits are reached: it runs here, in this process, with limits small enough
 // to reach.
 #include <gtest/gtest.h>
+#include <netinet/in.h>
+#include <poll.h>
 #include <sys/eventfd.h>
+#include <sys/socket.h>
 #include <unistd.h>
 
 #include <atomic>
 #include <mutex>
 #include <stdexcept>
 #include <thread>
+#include <vector>
 
 #include "lumora-local/server.h"
 #include "lumora-local/sqlite_store.h"
@@ -134,6 +138,75 @@ TEST(ServerLimits, DoNotHoldUpTheStop) {
     RawClient idle(server.port());
     server.finish();
     EXPECT_EQ(idle.readToEnd(), "");
+}
+
+/// TCP connections that never say a word.
+class SilentPeers {
+  public:
+    void connect(int port) {
+        const FileDescriptor& socket =
+            sockets_.emplace_back(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+        sockaddr_in address{};
+        address.sin_family = AF_INET;
+        address.sin_port = htons(static_cast<std::uint16_t>(port));
+        address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+        const auto* generic = reinterpret_cast<const sockaddr*>(&address);
+        ASSERT_EQ(::connect(socket.get(), generic, sizeof address), 0);
+    }
+
+    /// Waits for the service to close the connection.
+    bool isClosed(std::size_t index) {
+        pollfd state{sockets_[index].get(), POLLIN, 0};
+        char byte = 0;
+        return ::poll(&state, 1, 10'000) == 1 && ::recv(sockets_[index].get(), &byte, 1, 0) <= 0;
+    }
+
+    bool isOpen(std::size_t index) {
+        pollfd state{sockets_[index].get(), POLLIN, 0};
+        return ::poll(&state, 1, 0) == 0;
+    }
+
+  private:
+    std::vector<FileDescriptor> sockets_;
+};
+
+std::string healthAt(int port) {
+    RawClient client(port);
+    client.send(kHealth);
+    return client.readUntil("}").substr(0, 12);
+}
+
+TEST(SilentConnections, HoldBackNoOtherOne) {
+    LimitedServer server({.handshakeTime = std::chrono::hours(1)});
+    SilentPeers silent;
+    for (int i = 0; i < 150; ++i) silent.connect(server.port());
+    for (int i = 0; i < 20; ++i) EXPECT_EQ(healthAt(server.port()), "HTTP/1.1 200");
+    EXPECT_TRUE(silent.isOpen(0));
+}
+
+TEST(SilentConnections, MakeRoomTheOldestFirst) {
+    LimitedServer server({.connectionsPerAddress = 64, .handshakeTime = std::chrono::hours(1)});
+    SilentPeers silent;
+    for (int i = 0; i < 64; ++i) silent.connect(server.port());
+    EXPECT_EQ(healthAt(server.port()), "HTTP/1.1 200");
+    EXPECT_TRUE(silent.isClosed(0));
+    EXPECT_TRUE(silent.isOpen(1));
+}
+
+TEST(SilentConnections, EndWhenTheHandshakeTakesTooLong) {
+    LimitedServer server({.handshakeTime = kSoon});
+    SilentPeers silent;
+    silent.connect(server.port());
+    EXPECT_TRUE(silent.isClosed(0));
+}
+
+TEST(SilentConnections, DoNotHoldUpTheStop) {
+    LimitedServer server({.handshakeTime = std::chrono::hours(1)});
+    SilentPeers silent;
+    silent.connect(server.port());
+    EXPECT_EQ(healthAt(server.port()), "HTTP/1.1 200");
+    server.finish();
+    EXPECT_TRUE(silent.isClosed(0));
 }
 
 TEST(Server, SaysThatItsRecordsCannotBeReadAndStaysUp) {

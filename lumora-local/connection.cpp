@@ -1,0 +1,327 @@
+#include "lumora-local/connection.h"
+
+#include <array>
+#include <boost/asio/buffer.hpp>
+#include <boost/asio/post.hpp>
+#include <boost/asio/write.hpp>
+#include <boost/beast/http/error.hpp>
+#include <boost/beast/http/read.hpp>
+#include <boost/beast/http/write.hpp>
+#include <chrono>
+#include <exception>
+
+#include "foundation/date.h"
+#include "foundation/format.h"
+#include "foundation/process.h"
+
+namespace pinwell::lumora {
+namespace {
+
+namespace asio = boost::asio;
+namespace beast = boost::beast;
+namespace http = boost::beast::http;
+using foundation::format;
+using std::chrono::milliseconds;
+using Tcp = asio::ip::tcp;
+
+constexpr const char* kRequestIdentifierHeader = "X-Ostrel-Request-UUID";
+constexpr std::string_view kContinue = "HTTP/1.1 100 Continue\r\n\r\n";
+
+// What a body may bring beside itself when it comes in chunks.
+constexpr std::size_t kFramingAllowance = 256 * 1024;
+
+// How long a closing connection is read on: closing at once would make the kernel reset it and take the
+// answer back that the peer has yet to read.
+constexpr milliseconds kFarewellTime{5'000};
+constexpr std::size_t kFarewellBytes = 4 * 1024 * 1024;
+
+constexpr std::size_t kReadSize = 16 * 1024;
+
+std::string addressOf(const Tcp::endpoint& endpoint) {
+    boost::system::error_code ignored;
+    return endpoint.address().to_string(ignored);
+}
+
+std::string describe(const Tcp::endpoint& endpoint) {
+    return toString(Endpoint{addressOf(endpoint), endpoint.port()});
+}
+
+/// The head of an answer; the caller adds the body.
+template <class Body>
+void setHead(http::response<Body>& message, const Answer& answer, unsigned version, bool close) {
+    message.version(version);
+    message.result(static_cast<unsigned>(answer.status));
+    message.set(http::field::content_type, answer.contentType);
+    for (const auto& [name, value] : answer.headers) message.set(name, value);
+    message.keep_alive(!close);
+}
+
+}  // namespace
+
+Connection::Connection(ConnectionContext& context, Tcp::socket socket, std::shared_ptr<void> place)
+    : context_(context),
+      place_(std::move(place)),
+      plain_(std::move(socket)),
+      timer_(plain_->get_executor()),
+      buffer_(context.limits.headBytes + kReadSize) {}
+
+Connection::~Connection() {
+    if (identifier_ != 0) context_.table.leave(identifier_);
+}
+
+Tcp::socket& Connection::socket() {
+    return stream_ ? stream_->next_layer() : *plain_;
+}
+
+void Connection::start() {
+    ErrorCode error;
+    const Tcp::endpoint peer = plain_->remote_endpoint(error);
+    if (error) return;
+    plain_->set_option(Tcp::no_delay(true), error);
+    peer_ = describe(peer);
+    identifier_ = context_.table.enter(addressOf(peer), [weak = weak_from_this()] {
+        if (const auto self = weak.lock()) {
+            asio::post(self->socket().get_executor(), [self] { self->endIfSilent(); });
+        }
+    });
+    if (identifier_ == 0 || context_.stopping) return;
+    limitTime(context_.limits.handshakeTime);
+    plain_->async_wait(Tcp::socket::wait_read, [self = shared_from_this()](ErrorCode failure) {
+        if (!failure && self->phase_ != Phase::closing) self->handshake();
+    });
+}
+
+void Connection::handshake() {
+    tls_ = context_.tls.current();
+    stream_.emplace(*std::exchange(plain_, std::nullopt), *tls_);
+    stream_->async_handshake(asio::ssl::stream_base::server, [self = shared_from_this()](ErrorCode failure) {
+        if (failure || self->phase_ == Phase::closing) return self->timer_.cancel(), void();
+        self->established_ = true;
+        self->awaitRequest();
+    });
+}
+
+void Connection::awaitRequest() {
+    phase_ = Phase::silent;
+    context_.table.becomeSilent(identifier_);
+    if (buffer_.size() > 0) return beginRequest();
+    if (context_.stopping) return close(false);
+    limitTime(context_.limits.idleTime);
+    stream_->async_read_some(buffer_.prepare(kReadSize),
+                             [self = shared_from_this()](ErrorCode failure, std::size_t count) {
+                                 if (self->phase_ == Phase::closing) return;
+                                 if (failure) return self->close(false);
+                                 self->buffer_.commit(count);
+                                 self->beginRequest();
+                             });
+}
+
+void Connection::beginRequest() {
+    phase_ = Phase::reading;
+    context_.table.becomeBusy(identifier_);
+    ++served_;
+    received_ = 0;
+    headSeen_ = timedOut_ = unread_ = false;
+    closeAfterwards_ = served_ >= context_.limits.requestsPerConnection || context_.stopping;
+    parser_.emplace();
+    parser_->header_limit(static_cast<std::uint32_t>(context_.limits.headBytes));
+    parser_->body_limit(kMaximumBodySize);
+    limitTime(context_.limits.requestTime);
+    readMore();
+}
+
+void Connection::readMore() {
+    http::async_read_some(
+        *stream_, buffer_, *parser_,
+        [self = shared_from_this()](ErrorCode error, std::size_t count) { self->onRead(error, count); });
+}
+
+void Connection::onRead(ErrorCode error, std::size_t count) {
+    received_ += count;
+    if (error) return refuseUnreadable(error);
+    if (!parser_->is_header_done()) {
+        if (received_ > context_.limits.headBytes) return respond(requestRefusal(431), true);
+        return readMore();
+    }
+    if (!headSeen_) {
+        headSeen_ = true;
+        return onHead();
+    }
+    if (parser_->is_done()) return onBody();
+    if (received_ > context_.limits.headBytes + kMaximumBodySize + kFramingAllowance) {
+        return respond(requestRefusal(413), true);
+    }
+    readMore();
+}
+
+void Connection::refuseUnreadable(ErrorCode error) {
+    if (timedOut_) return respond(requestRefusal(408), true);
+    const bool headDone = parser_->is_header_done();
+    if (error == http::error::header_limit || (error == http::error::buffer_overflow && !headDone)) {
+        return respond(requestRefusal(431), true);
+    }
+    if (error == http::error::body_limit || error == http::error::buffer_overflow) {
+        return respond(requestRefusal(413), true);
+    }
+    if (error.category() == make_error_code(http::error::end_of_stream).category() &&
+        error != http::error::end_of_stream && error != http::error::partial_message) {
+        return respond(requestRefusal(400), true);
+    }
+    close(false);  // the peer has gone
+}
+
+template <class Work>
+std::optional<Answer> Connection::guarded(Work&& work) {
+    try {
+        return work();
+    } catch (const std::exception& error) {
+        context_.errorLog(format("cannot answer a request: %s", error.what()));
+        Answer answer = refusal(503, "SERVICE_UNAVAILABLE", "The records cannot be read at the moment");
+        answer.headers.emplace_back("Retry-After", "1");
+        return answer;
+    }
+}
+
+void Connection::onHead() {
+    const HttpRequest& request = parser_->get();
+    if (!request.keep_alive()) closeAfterwards_ = true;
+    if (const auto refused = refuseHead(request)) return respond(*refused, announcesBody(request));
+    std::optional<Answer> answer = guarded([&] { return context_.lookups.answerHead(headOf(request)); });
+    if (!answer) answer = refuseMissingLength(request);
+    if (answer) return respond(*answer, announcesBody(request));
+    if (parser_->is_done()) return onBody();
+    if (expectsContinue(request)) return continueThenRead();
+    readMore();
+}
+
+void Connection::continueThenRead() {
+    asio::async_write(*stream_, asio::buffer(kContinue.data(), kContinue.size()),
+                      [self = shared_from_this()](ErrorCode error, std::size_t) {
+                          if (error) return self->close(false);
+                          self->readMore();
+                      });
+}
+
+void Connection::onBody() {
+    const HttpRequest& request = parser_->get();
+    respond(*guarded([&] {
+        return std::optional(context_.lookups.answerLookup(headOf(request), request.body()));
+    }),
+            false);
+}
+
+void Connection::respond(const Answer& answer, bool bodyLeftBehind) {
+    phase_ = Phase::writing;
+    limitTime(context_.limits.requestTime);
+    unread_ = bodyLeftBehind;
+    closeAfterwards_ = closeAfterwards_ || bodyLeftBehind || context_.stopping;
+    const HttpRequest& request = parser_->get();
+    const unsigned version = headSeen_ ? request.version() : 11;
+    const std::string identifier = foundation::globallyUniqueString();
+    const RequestHead head = headSeen_ ? headOf(request) : RequestHead{};
+    const bool withoutBody = request.method() == http::verb::head;
+    const auto done = [self = shared_from_this()](ErrorCode error, std::size_t) { self->onWritten(error); };
+
+    const std::size_t size = answer.asset ? answer.asset->size() : answer.body.size();
+    context_.accessLog(format("%@ %s \"%s %s\" %d %zu %s", foundation::Date::now(), peer_, head.method,
+                              head.target, answer.status, size, identifier));
+    if (answer.asset && !withoutBody) {
+        asset_ = answer.asset;
+        // The library's own cast: a body of characters over the bytes that all downloads share.
+        const auto* characters = reinterpret_cast<const char*>(asset_->data());
+        assetMessage_.emplace();
+        setHead(*assetMessage_, answer, version, closeAfterwards_);
+        assetMessage_->set(kRequestIdentifierHeader, identifier);
+        assetMessage_->body() = beast::span<const char>(characters, size);
+        assetMessage_->content_length(size);
+        http::async_write(*stream_, *assetMessage_, done);
+        return;
+    }
+    message_.emplace();
+    setHead(*message_, answer, version, closeAfterwards_);
+    message_->set(kRequestIdentifierHeader, identifier);
+    if (!withoutBody) message_->body() = answer.body;
+    message_->content_length(size);
+    http::async_write(*stream_, *message_, done);
+}
+
+void Connection::onWritten(ErrorCode error) {
+    message_.reset();
+    assetMessage_.reset();
+    asset_.reset();
+    if (phase_ == Phase::closing) return;
+    if (error) return close(false);
+    if (closeAfterwards_) return close(unread_);
+    parser_.reset();
+    if (buffer_.size() == 0) buffer_.shrink_to_fit();
+    awaitRequest();
+}
+
+void Connection::close(bool unread) {
+    phase_ = Phase::closing;
+    context_.table.becomeSilent(identifier_);
+    unread_ = unread;
+    if (!stream_) {
+        timer_.cancel();
+        ErrorCode ignored;
+        socket().close(ignored);
+        return;
+    }
+    limitTime(kFarewellTime);
+    stream_->async_shutdown([self = shared_from_this()](ErrorCode) {
+        ErrorCode ignored;
+        if (!self->unread_) {
+            self->timer_.cancel();
+            self->socket().close(ignored);
+            return;
+        }
+        self->socket().shutdown(Tcp::socket::shutdown_send, ignored);
+        self->drain(0);
+    });
+}
+
+void Connection::drain(std::size_t drained) {
+    buffer_.clear();
+    socket().async_read_some(buffer_.prepare(kReadSize),
+                             [self = shared_from_this(), drained](ErrorCode error, std::size_t count) {
+                                 if (!error && drained + count < kFarewellBytes)
+                                     return self->drain(drained + count);
+                                 self->timer_.cancel();
+                                 ErrorCode ignored;
+                                 self->socket().close(ignored);
+                             });
+}
+
+void Connection::limitTime(milliseconds time) {
+    timer_.expires_after(time);
+    timer_.async_wait([self = shared_from_this()](ErrorCode error) {
+        if (!error && self->timer_.expiry() <= asio::steady_timer::clock_type::now()) self->onTimeout();
+    });
+}
+
+void Connection::onTimeout() {
+    ErrorCode ignored;
+    if (phase_ == Phase::reading) {
+        timedOut_ = true;
+        socket().cancel(ignored);  // the read ends, and the refusal goes out
+    } else if (phase_ == Phase::silent && established_) {
+        socket().cancel(ignored);  // the read ends, and the connection is closed in good form
+    } else {
+        phase_ = Phase::closing;
+        socket().close(ignored);
+    }
+}
+
+void Connection::endIfSilent() {
+    if (phase_ != Phase::silent) return;
+    ErrorCode ignored;
+    if (established_) {
+        socket().cancel(ignored);
+        return;
+    }
+    phase_ = Phase::closing;
+    timer_.cancel();
+    socket().close(ignored);
+}
+
+}  // namespace pinwell::lumora

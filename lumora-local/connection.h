@@ -1,0 +1,106 @@
+// One client's connection: handshake, requests, answers, each within its time and size.
+//
+// All of it runs on the connection's own strand. Nothing blocks while a client is slow: what a connection
+// costs then is memory alone, and little before its first byte.
+#pragma once
+
+#include <atomic>
+#include <boost/asio/ip/tcp.hpp>
+#include <boost/asio/steady_timer.hpp>
+#include <boost/beast/core/flat_buffer.hpp>
+#include <boost/beast/http/message.hpp>
+#include <boost/beast/http/parser.hpp>
+#include <boost/beast/http/span_body.hpp>
+#include <boost/beast/http/string_body.hpp>
+#include <boost/beast/ssl/ssl_stream.hpp>
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "lumora-local/connection_table.h"
+#include "lumora-local/http_rules.h"
+#include "lumora-local/server.h"
+
+namespace pinwell::lumora {
+
+/// What every connection of a server shares. Outlives them all.
+struct ConnectionContext {
+    const LookupService& lookups;
+    const TlsContext& tls;
+    const Server::LogLine& accessLog;
+    const Server::LogLine& errorLog;
+    const ServerLimits& limits;
+    ConnectionTable& table;
+    const std::atomic<bool>& stopping;
+};
+
+class Connection : public std::enable_shared_from_this<Connection> {
+  public:
+    /// Takes an accepted socket whose executor is a strand. `place` is released when the connection is gone.
+    Connection(ConnectionContext& context, boost::asio::ip::tcp::socket socket, std::shared_ptr<void> place);
+    ~Connection();
+    Connection(const Connection&) = delete;
+    Connection& operator=(const Connection&) = delete;
+
+    /// Enters the table and waits for the first byte; does nothing if the table has no place. Keeps itself
+    /// alive from here on.
+    void start();
+
+  private:
+    using ErrorCode = boost::system::error_code;
+    using Stream = boost::beast::ssl_stream<boost::asio::ip::tcp::socket>;
+    using Parser = boost::beast::http::request_parser<boost::beast::http::string_body>;
+    using Response = boost::beast::http::response<boost::beast::http::span_body<const char>>;
+    using Message = boost::beast::http::response<boost::beast::http::string_body>;
+
+    enum class Phase { silent, reading, writing, closing };
+
+    void handshake();
+    void awaitRequest();
+    void beginRequest();
+    void readMore();
+    void onRead(ErrorCode error, std::size_t count);
+    void onHead();
+    void continueThenRead();
+    void onBody();
+    void refuseUnreadable(ErrorCode error);
+    void respond(const Answer& answer, bool bodyLeftBehind);
+    void onWritten(ErrorCode error);
+    void close(bool unread);
+    void drain(std::size_t drained);
+
+    template <class Work>
+    std::optional<Answer> guarded(Work&& work);
+
+    /// One timer for whatever is waited for; a later call replaces it.
+    void limitTime(std::chrono::milliseconds time);
+    void onTimeout();
+    void endIfSilent();
+
+    boost::asio::ip::tcp::socket& socket();
+
+    ConnectionContext& context_;
+    std::shared_ptr<void> place_;
+    std::optional<boost::asio::ip::tcp::socket> plain_;  // until the first byte
+    std::shared_ptr<boost::asio::ssl::context> tls_;
+    std::optional<Stream> stream_;  // from the first byte on
+    boost::asio::steady_timer timer_;
+    std::string peer_;
+    ConnectionTable::Identifier identifier_ = 0;
+    Phase phase_ = Phase::silent;
+
+    boost::beast::flat_buffer buffer_;
+    std::optional<Parser> parser_;
+    std::optional<Message> message_;
+    std::shared_ptr<const foundation::Data> asset_;
+    std::optional<Response> assetMessage_;
+    std::size_t received_ = 0;  // bytes of this request
+    std::size_t served_ = 0;    // requests of this connection
+    bool established_ = false;  // the handshake is done
+    bool headSeen_ = false;
+    bool timedOut_ = false;
+    bool closeAfterwards_ = false;
+    bool unread_ = false;
+};
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,45 @@
+#include "lumora-local/tls_context.h"
+
+#include <boost/asio/ssl/context.hpp>
+
+#include "lumora-local/openssl_handles.h"
+
+namespace pinwell::lumora {
+namespace {
+
+std::shared_ptr<boost::asio::ssl::context> load(const std::string& certificatePath,
+                                                const std::string& keyPath) {
+    auto context = std::make_shared<boost::asio::ssl::context>(boost::asio::ssl::context::tls_server);
+    SSL_CTX* native = context->native_handle();
+    require(SSL_CTX_set_min_proto_version(native, TLS1_2_VERSION) == 1, "set up TLS");
+    SSL_CTX_set_options(native, SSL_OP_NO_RENEGOTIATION | SSL_OP_NO_COMPRESSION);
+    SSL_CTX_set_mode(native, SSL_MODE_RELEASE_BUFFERS);  // an idle connection keeps no record buffers
+    require(SSL_CTX_use_certificate_chain_file(native, certificatePath.c_str()) == 1,
+            "use the certificate in " + certificatePath);
+    require(SSL_CTX_use_PrivateKey_file(native, keyPath.c_str(), SSL_FILETYPE_PEM) == 1,
+            "use the key in " + keyPath);
+    require(SSL_CTX_check_private_key(native) == 1, "use the key in " + keyPath);
+    return context;
+}
+
+}  // namespace
+
+TlsContext::TlsContext(std::string certificatePath, std::string keyPath)
+    : certificatePath_(std::move(certificatePath)),
+      keyPath_(std::move(keyPath)),
+      current_(load(certificatePath_, keyPath_)) {}
+
+TlsContext::~TlsContext() = default;
+
+std::shared_ptr<boost::asio::ssl::context> TlsContext::current() const {
+    const std::lock_guard lock(mutex_);
+    return current_;
+}
+
+void TlsContext::reload() {
+    auto loaded = load(certificatePath_, keyPath_);
+    const std::lock_guard lock(mutex_);
+    current_ = std::move(loaded);
+}
+
+}  // namespace pinwell::lumora
