@@ -9,6 +9,7 @@ pkg_check_modules(GIO REQUIRED IMPORTED_TARGET gio-2.0>=2.66)
 pkg_check_modules(PLIST REQUIRED IMPORTED_TARGET libplist-2.0)
 find_package(LibXml2 2.9 REQUIRED)
 find_package(ZLIB REQUIRED)
+pkg_check_modules(RE2 REQUIRED IMPORTED_TARGET re2)
 pkg_check_modules(SECCOMP REQUIRED IMPORTED_TARGET libseccomp>=2.5)
 
 # The local record service alone.

@@ -1,20 +1,27 @@
 #include "verify/bundle.h"
 
+#include <algorithm>
+#include <utility>
+
 #include "codesign/code_error.h"
 #include "foundation/format.h"
 #include "foundation/property_list.h"
 #include "verify/bundle_layout.h"
+#include "verify/bundle_walk.h"
 #include "verify/check_names.h"
+#include "verify/page_hashes.h"
 
 namespace pinwell::verify {
 
 using codesign::CodeError;
+using foundation::format;
 
 namespace {
 
 /// A property list, or a seal. Longer ones are refused.
 constexpr std::uint64_t kMaximumComponent = foundation::kMaximumPropertyListSize;
 
+/// `nullopt` if there is no such file.
 std::optional<Data> componentAt(const DirectoryRef& root, const std::string& path) {
     if (path.empty()) return std::nullopt;
     try {
@@ -27,17 +34,76 @@ std::optional<Data> componentAt(const DirectoryRef& root, const std::string& pat
     }
 }
 
+const Data* addressOf(const std::optional<Data>& data) {
+    return data ? &*data : nullptr;
+}
+
+/// The executable of a bundle that is no executable image, with its signature in files of its own.
+VerifiedCode verifySeparately(const codesign::ByteSource& executable, const BundleLayout& layout,
+                              const OutsideComponents& outside, const std::string& place, Workers& workers,
+                              Section& section) {
+    const std::string directory = kSignatureDirectory + "/";
+    std::optional<Data> codeDirectory = componentAt(layout.root, directory + "CodeDirectory");
+    if (!codeDirectory) return {};
+    const std::optional<SignatureParts> parts = SignatureParts::fromSeparateFiles(
+        *std::move(codeDirectory), componentAt(layout.root, directory + "CodeRequirements"),
+        componentAt(layout.root, directory + "CodeSignature").value_or(Data()));
+    section.pass(kSignature, place, "a well-formed signature");
+    checkSigner(*parts, place, section);
+    checkSpecialSlots(*parts, outside, place, section);
+    checkCodeLimit(*parts, executable.size(), "the end of the file", place, section);
+    checkPageHashes(executable, {0, executable.size()}, *parts, place, workers, section);
+    return {.isSigned = true, .identities = {identityOf(*parts, place)}};
+}
+
+std::string joined(const std::string& a, const std::string& b) {
+    return a.empty() || b.empty() ? a + b : a + "/" + b;
+}
+
 }  // namespace
 
-VerifiedCode verifyBundle(const std::string& path, Workers& workers, Section& section) {
+VerifiedCode verifyBundleAt(const std::string& path, const std::string& place, WalkState& state,
+                            Section& section) {
     const BundleLayout layout = layoutOfBundle(path);
+    const std::string rootPlace = joined(place, layout.rootPath);
+    const std::string executablePlace = joined(rootPlace, layout.executable);
+    section.place = place;
+
     const std::optional<Data> list = componentAt(layout.root, layout.propertyList);
-    const std::optional<Data> seal = componentAt(layout.root, kSignatureDirectory + "/" + kSealFile);
-    const OutsideComponents outside{{kSlotPropertyList, {.bytes = list ? &*list : nullptr}},
-                                    {kSlotResourceSeal, {.bytes = seal ? &*seal : nullptr}}};
+    const std::optional<Data> document = componentAt(layout.root, kSignatureDirectory + "/" + kSealFile);
+    const OutsideComponents outside{{kSlotPropertyList, {.bytes = addressOf(list)}},
+                                    {kSlotResourceSeal, {.bytes = addressOf(document)}}};
     const auto executable = layout.root->fileAt(layout.executable);
-    return verifyExecutable(*executable, outside, layout.rootPath + "/" + layout.executable, workers,
-                            section);
+    const bool isImage = codesign::isExecutableImage(*executable);
+    VerifiedCode code =
+        isImage ? verifyExecutable(*executable, outside, executablePlace, state.workers, section)
+                : verifySeparately(*executable, layout, outside, executablePlace, state.workers, section);
+
+    const std::string sealPlace = joined(rootPlace, kSignatureDirectory + "/" + kSealFile);
+    if (!code.isSigned && !document) return code;
+    code.isSigned = true;
+    if (!document) {
+        section.fail(kSeal, sealPlace, "the seal of the bundle's resources", "none");
+        return code;
+    }
+    try {
+        const Seal seal = Seal::parse(*document);
+        section.pass(kSeal, sealPlace,
+                     format("a seal of version %d with %zu entries", seal.version(), seal.entries().size()));
+        BundleWalk(layout, rootPlace, path, seal, isImage, state, section, code).run();
+    } catch (const CodeError& error) {
+        if (error.status() == codesign::kIOError) {
+            section.cannotRead(kSeal, rootPlace, error.what());
+        } else {
+            section.fail(kSeal, sealPlace, "a well-formed seal", error.what());
+        }
+    }
+    return code;
+}
+
+VerifiedCode verifyBundle(const std::string& path, Workers& workers, Section& section) {
+    WalkState state{.workers = workers, .entries = 0, .depth = 0};
+    return verifyBundleAt(path, {}, state, section);
 }
 
 }  // namespace pinwell::verify

@@ -1,0 +1,66 @@
+// The walk over the files of one bundle, with its seal in hand. For bundle.cpp.
+#pragma once
+
+#include <string>
+
+#include "verify/bundle_layout.h"
+#include "verify/executable.h"
+#include "verify/seal.h"
+#include "verify/sealed_files.h"
+
+namespace pinwell::verify {
+
+/// What the walks over a bundle and over all that is nested in it have in common.
+struct WalkState {
+    Workers& workers;
+    std::size_t entries = 0;  // directory entries met so far
+    unsigned depth = 0;       // directories and bundles around the one that is walked
+};
+
+/// The bundle at `path`, which is at `place` in the artefact.
+VerifiedCode verifyBundleAt(const std::string& path, const std::string& place, WalkState& state,
+                            Section& section);
+
+class BundleWalk {
+  public:
+    /// `rootPlace`: where the root of the seal is in the artefact. `bundlePath`: where the bundle is on disk.
+    /// The identities of nested code go into `code`.
+    BundleWalk(const BundleLayout& layout, std::string rootPlace, std::string bundlePath, const Seal& seal,
+               bool isImage, WalkState& state, Section& section, VerifiedCode& code);
+
+    /// Throws codesign::CodeError if a directory cannot be read, or passes the limits.
+    void run();
+
+  private:
+    void checkAround();
+    void checkFrameworkAround();
+    void walk(const DirectoryRef& directory, const std::string& relative);
+    void visit(const DirectoryRef& directory, const Entry& entry, const std::string& relative);
+    bool visitSpecial(const DirectoryRef& directory, const Entry& entry, const std::string& relative);
+    void visitSignatureDirectory(const DirectoryRef& directory);
+    void visitSealed(const DirectoryRef& directory, const Entry& entry, const SealedEntry& sealed);
+    void visitUnsealed(const std::string& relative);
+    void visitLink(const DirectoryRef& directory, const Entry& entry, const SealedEntry& sealed);
+    void visitNested(const DirectoryRef& directory, const Entry& entry, const SealedEntry& sealed);
+    void bindNested(VerifiedCode nested, const SealedEntry& sealed, Section& section);
+    void reportMissing();
+
+    std::string placeOf(const std::string& relative) const;
+    std::vector<Entry> entriesOf(const DirectoryRef& directory);
+
+    const BundleLayout& layout_;
+    const std::string rootPlace_;
+    const std::string bundlePath_;
+    const Seal& seal_;
+    const bool isImage_;
+    WalkState& state_;
+    Section& section_;
+    VerifiedCode& code_;
+
+    SealedFiles files_;
+    FailureList unsealed_;
+    FailureList links_;
+    std::size_t goodLinks_ = 0;
+};
+
+}  // namespace pinwell::verify
