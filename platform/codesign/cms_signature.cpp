@@ -1,113 +1,151 @@
 #include "codesign/cms_signature.h"
 
-#include <openssl/bio.h>
-#include <openssl/cms.h>
-#include <openssl/evp.h>
-#include <openssl/ts.h>
+#include <openssl/x509.h>
 
 #include <algorithm>
-#include <array>
-#include <chrono>
-#include <ctime>
+#include <string_view>
 
+#include "codesign/cms_message.h"
+#include "codesign/code_error.h"
+#include "codesign/signer_key.h"
+#include "codesign/time_stamp.h"
 #include "trust/openssl.h"
 
 namespace pinwell::codesign {
 
+using foundation::asBytes;
 using foundation::ByteView;
+using foundation::Data;
 using foundation::Date;
-using trust::byteView;
 using trust::ErrorQueueGuard;
 using trust::unsignedBytes;
 
 namespace {
 
-using Message = foundation::Handle<CMS_ContentInfo, CMS_ContentInfo_free>;
-using Bio = foundation::Handle<BIO, BIO_free_all>;
-using TstInfo = foundation::Handle<TS_TST_INFO, TS_TST_INFO_free>;
+using Name = foundation::Handle<X509_NAME, X509_NAME_free>;
 
-/// A SignedData that fills `bytes`; nothing otherwise.
-Message parseSignedData(ByteView bytes) {
-    if (bytes.empty() || bytes.size() > kMaximumCmsLength) return nullptr;
+constexpr const char* kSignedAttributes = "the signed attributes";
+constexpr const char* kUnsignedAttributes = "the unsigned attributes";
+
+constexpr std::string_view kPlainData = "\x2A\x86\x48\x86\xF7\x0D\x01\x07\x01";  // 1.2.840.113549.1.7.1
+constexpr std::string_view kContentTypeAttribute = "\x2A\x86\x48\x86\xF7\x0D\x01\x09\x03";    // ....1.9.3
+constexpr std::string_view kMessageDigestAttribute = "\x2A\x86\x48\x86\xF7\x0D\x01\x09\x04";  // ....1.9.4
+constexpr std::string_view kTimeStampContent =
+    "\x2A\x86\x48\x86\xF7\x0D\x01\x09\x10\x01\x04";  // 1.2.840.113549.1.9.16.1.4
+constexpr std::string_view kTimeStampTokenAttribute =
+    "\x2A\x86\x48\x86\xF7\x0D\x01\x09\x10\x02\x0E";  // 1.2.840.113549.1.9.16.2.14
+
+/// Longest name that is compared otherwise than byte by byte. Those in certificates take some 100 bytes.
+constexpr std::size_t kMaximumNameSize = 4096;
+
+bool isEqual(ByteView a, ByteView b) {
+    return std::ranges::equal(a, b);
+}
+
+Name parseName(ByteView bytes) {
     const unsigned char* cursor = unsignedBytes(bytes);
-    Message message(d2i_CMS_ContentInfo(nullptr, &cursor, static_cast<long>(bytes.size())));
-    if (!message || cursor != unsignedBytes(bytes) + bytes.size()) return nullptr;
-    if (OBJ_obj2nid(CMS_get0_type(message.get())) != NID_pkcs7_signed) return nullptr;
-    return message;
+    return Name(d2i_X509_NAME(nullptr, &cursor, static_cast<long>(bytes.size())));
 }
 
-CMS_SignerInfo* firstSigner(const Message& message) {
-    STACK_OF(CMS_SignerInfo)* signers = CMS_get0_SignerInfos(message.get());
-    if (signers == nullptr || sk_CMS_SignerInfo_num(signers) < 1) return nullptr;
-    return sk_CMS_SignerInfo_value(signers, 0);
+// A name may be written with other string types in the message than in the certificate.
+bool isSameName(ByteView a, ByteView b) {
+    if (isEqual(a, b)) return true;
+    if (a.size() > kMaximumNameSize || b.size() > kMaximumNameSize) return false;
+    const Name first = parseName(a);
+    const Name second = parseName(b);
+    return first && second && X509_NAME_cmp(first.get(), second.get()) == 0;
 }
 
-constexpr unsigned kVerifyFlags = CMS_BINARY | CMS_NO_SIGNER_CERT_VERIFY;
-
-/// Whether `imprint` is the digest of `bytes` under its own algorithm.
-bool imprintMatches(TS_MSG_IMPRINT* imprint, ByteView bytes) {
-    const ASN1_OBJECT* algorithm = nullptr;
-    X509_ALGOR_get0(&algorithm, nullptr, nullptr, TS_MSG_IMPRINT_get_algo(imprint));
-    const EVP_MD* digest = EVP_get_digestbyobj(algorithm);
-    if (digest == nullptr) return false;
-    std::array<unsigned char, EVP_MAX_MD_SIZE> value = {};
-    unsigned length = 0;
-    if (EVP_Digest(bytes.data(), bytes.size(), value.data(), &length, digest, nullptr) != 1) return false;
-    const ByteView computed = std::as_bytes(std::span(value)).first(length);
-    const ByteView stated = byteView(TS_MSG_IMPRINT_get_msg(imprint));
-    return std::equal(computed.begin(), computed.end(), stated.begin(), stated.end());
+/// A number without the leading bytes that only repeat its sign.
+ByteView shortestNumber(ByteView number) {
+    const auto isNegative = [](std::byte digit) { return (digit & std::byte{0x80}) != std::byte{}; };
+    while (number.size() > 1 && number[0] == (isNegative(number[1]) ? std::byte{0xFF} : std::byte{0}))
+        number = number.subspan(1);
+    return number;
 }
 
-std::optional<Date> dateFrom(const ASN1_GENERALIZEDTIME* time) {
-    std::tm parts = {};
-    if (time == nullptr || ASN1_TIME_to_tm(time, &parts) != 1) return std::nullopt;
-    using namespace std::chrono;
-    const sys_days day = year(parts.tm_year + 1900) / month(static_cast<unsigned>(parts.tm_mon + 1)) /
-                         std::chrono::day(static_cast<unsigned>(parts.tm_mday));
-    const seconds moment =
-        day.time_since_epoch() + hours(parts.tm_hour) + minutes(parts.tm_min) + seconds(parts.tm_sec);
-    return Date{moment.count()};
+bool isOf(const MessageCertificate& certificate, const MessageSigner& signer) {
+    if (signer.keyIdentifier) return certificate.keyIdentifier == signer.keyIdentifier;
+    return isEqual(shortestNumber(certificate.serialNumber), shortestNumber(signer.serialNumber)) &&
+           isSameName(certificate.issuer, signer.issuer);
+}
+
+const MessageCertificate& certificateOfSigner(const SignedMessage& message) {
+    const auto found = std::ranges::find_if(
+        message.certificates, [&](const MessageCertificate& one) { return isOf(one, message.signer); });
+    if (found == message.certificates.end()) refuse("the signer's certificate is not in the message");
+    return *found;
+}
+
+// What the signature is over, instead of the content.
+Data signedBytes(const SignedMessage& message, ByteView content) {
+    const MessageSigner& signer = message.signer;
+    const ber::Element& attributes = *signer.signedAttributes;
+    const auto type = soleValueOf(attributes, asBytes(kContentTypeAttribute), kSignedAttributes);
+    if (!type || type->tag != ber::kObjectIdentifier || !isEqual(type->contents, message.contentType))
+        refuse("the signed attributes have not the content's type");
+    const auto digest = soleValueOf(attributes, asBytes(kMessageDigestAttribute), kSignedAttributes);
+    const auto computed = messageDigest(signer.digestAlgorithm, content);
+    if (!computed) refuse("the signer's digest algorithm is unknown");
+    ber::Work work;
+    if (!digest || (digest->tag & ~ber::kConstructed) != ber::kOctetString ||
+        ber::octets(*digest, work, kSignedAttributes) != *computed)
+        refuse("the signed attributes have not the content's digest");
+    Data bytes = ber::inDer(attributes, work, kSignedAttributes);
+    bytes.front() = std::byte{ber::kSet};  // it is [0] in the message
+    return bytes;
+}
+
+void requireSignedBySigner(const SignedMessage& message, ByteView content) {
+    const MessageSigner& signer = message.signer;
+    const auto isSigners = [&](const Algorithm& listed) {
+        return isEqual(listed.identifier, signer.digestAlgorithm.identifier);
+    };
+    if (std::ranges::none_of(message.digestAlgorithms, isSigners))
+        refuse("the message does not list the signer's digest algorithm");
+    if (!signer.signedAttributes && !isEqual(message.contentType, asBytes(kPlainData)))
+        refuse("the message has no signed attributes");
+    const MessageCertificate& certificate = certificateOfSigner(message);
+    const Data attributes = signer.signedAttributes ? signedBytes(message, content) : Data();
+    requireSignature(certificate.publicKey, signer.digestAlgorithm, signer.signatureAlgorithm,
+                     signer.signature, signer.signedAttributes ? ByteView(attributes) : content);
 }
 
 /// The content of a time-stamp token whose own signature verifies.
-TstInfo verifiedTokenContent(ByteView token) {
-    const Message message = parseSignedData(token);
-    if (!message || firstSigner(message) == nullptr) return nullptr;
-    if (OBJ_obj2nid(CMS_get0_eContentType(message.get())) != NID_id_smime_ct_TSTInfo) return nullptr;
-    if (CMS_is_detached(message.get()) != 0) return nullptr;
-    if (CMS_verify(message.get(), nullptr, nullptr, nullptr, nullptr, kVerifyFlags) != 1) return nullptr;
-    const ByteView content = byteView(*CMS_get0_content(message.get()));
-    const unsigned char* cursor = unsignedBytes(content);
-    TstInfo info(d2i_TS_TST_INFO(nullptr, &cursor, static_cast<long>(content.size())));
-    if (!info || cursor != unsignedBytes(content) + content.size()) return nullptr;
-    return info;
+Data requireToken(ByteView bytes) {
+    SignedMessage token = parseSignedMessage(bytes);
+    if (!token.content || !isEqual(token.contentType, asBytes(kTimeStampContent)))
+        refuse("the time-stamp token holds no time stamp");
+    requireSignedBySigner(token, *token.content);
+    return *std::move(token.content);
 }
 
 }  // namespace
 
-bool verifyDetachedCms(ByteView cms, ByteView content) {
+void requireDetachedCms(ByteView cms, ByteView content) {
     const ErrorQueueGuard guard;
-    const Message message = parseSignedData(cms);
-    if (!message || firstSigner(message) == nullptr) return false;
-    if (CMS_is_detached(message.get()) != 1) return false;
-    const Bio data(BIO_new_mem_buf(content.data(), static_cast<int>(content.size())));
-    return data && CMS_verify(message.get(), nullptr, nullptr, data.get(), nullptr, kVerifyFlags) == 1;
+    const SignedMessage message = parseSignedMessage(cms);
+    if (message.content) refuse("the signer's message is not detached");
+    requireSignedBySigner(message, content);
 }
 
 std::optional<Date> secureTimestamp(ByteView cms) {
     const ErrorQueueGuard guard;
-    const Message message = parseSignedData(cms);
-    CMS_SignerInfo* signer = message ? firstSigner(message) : nullptr;
-    if (signer == nullptr) return std::nullopt;
-    // -3: exactly one such attribute with exactly one value; with more, none of them could be preferred.
-    const void* attribute = CMS_unsigned_get0_data_by_OBJ(signer, OBJ_nid2obj(NID_id_smime_aa_timeStampToken),
-                                                          -3, V_ASN1_SEQUENCE);
-    if (attribute == nullptr) return std::nullopt;
-    const TstInfo info = verifiedTokenContent(byteView(static_cast<const ASN1_STRING*>(attribute)));
-    if (!info) return std::nullopt;
-    const ByteView signature = byteView(CMS_SignerInfo_get0_signature(signer));
-    if (!imprintMatches(TS_TST_INFO_get_msg_imprint(info.get()), signature)) return std::nullopt;
-    return dateFrom(TS_TST_INFO_get_time(info.get()));
+    try {
+        const SignedMessage message = parseSignedMessage(cms);
+        if (!message.signer.unsignedAttributes) return std::nullopt;
+        // With more than one token, none of them could be preferred.
+        const auto token = soleValueOf(*message.signer.unsignedAttributes, asBytes(kTimeStampTokenAttribute),
+                                       kUnsignedAttributes);
+        if (!token) return std::nullopt;
+        const Data content = requireToken(token->whole);
+        const TimeStamp stamp = parseTimeStamp(content);
+        const auto imprint = messageDigest(stamp.imprintAlgorithm, message.signer.signature);
+        if (!imprint || !isEqual(*imprint, stamp.imprint)) return std::nullopt;
+        return stamp.time;
+    } catch (const CodeError&) {
+        return std::nullopt;
+    }
 }
 
 }  // namespace pinwell::codesign

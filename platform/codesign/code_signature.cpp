@@ -92,8 +92,8 @@ void CodeSignature::requireValid() const {
     }
     if (components_.cms.empty()) {
         if ((chosen().flags() & kFlagAdHoc) == 0) refuse("no signer, and not ad hoc");
-    } else if (!verifyDetachedCms(components_.cms, primary_)) {
-        refuse("the signer's signature does not verify");
+    } else {
+        requireDetachedCms(components_.cms, primary_);
     }
 }
 

@@ -6,11 +6,12 @@
 #include <openssl/rsa.h>
 #include <openssl/ts.h>
 #include <openssl/x509.h>
+#include <openssl/x509v3.h>
 
 #include <stdexcept>
 
-#include "foundation/byte_writer.h"
 #include "foundation/handle.h"
+#include "support/cms_parts.h"
 #include "support/code_directory_builder.h"
 
 namespace pinwell::test {
@@ -20,6 +21,7 @@ namespace {
 using Key = foundation::Handle<EVP_PKEY, EVP_PKEY_free>;
 using Certificate = foundation::Handle<X509, X509_free>;
 using Message = foundation::Handle<CMS_ContentInfo, CMS_ContentInfo_free>;
+using Extension = foundation::Handle<X509_EXTENSION, X509_EXTENSION_free>;
 using Bio = foundation::Handle<BIO, BIO_free_all>;
 using TstInfo = foundation::Handle<TS_TST_INFO, TS_TST_INFO_free>;
 using Imprint = foundation::Handle<TS_MSG_IMPRINT, TS_MSG_IMPRINT_free>;
@@ -53,6 +55,10 @@ Identity makeIdentity(TestKey kind) {
     X509_NAME_add_entry_by_txt(name, "CN", MBSTRING_ASC, text, -1, -1, 0);
     X509_set_issuer_name(certificate, name);
     X509_set_pubkey(certificate, identity.key.get());
+    X509V3_CTX context;
+    X509V3_set_ctx(&context, certificate, certificate, nullptr, nullptr, 0);
+    const Extension identifier(X509V3_EXT_conf_nid(nullptr, &context, NID_subject_key_identifier, "hash"));
+    require(identifier && X509_add_ext(certificate, identifier.get(), -1) == 1, "key identifier");
     require(X509_sign(certificate, identity.key.get(), EVP_sha256()) > 0, "certificate signature");
     return identity;
 }
@@ -88,15 +94,20 @@ CMS_SignerInfo* signerOf(const Message& message) {
 }
 
 /// One signer's message over `content`; `flags` of CMS_sign.
-Message signMessage(const Identity& identity, int contentType, ByteView content, unsigned flags) {
-    flags |= CMS_BINARY;
+Message signMessage(const Identity& identity, int contentType, ByteView content, unsigned flags,
+                    bool pss = false) {
+    flags |= CMS_BINARY | (pss ? CMS_KEY_PARAM : 0U);
     Message message(CMS_sign(nullptr, nullptr, nullptr, nullptr, flags | CMS_PARTIAL));
     require(message != nullptr, "message");
     Object type(OBJ_dup(OBJ_nid2obj(contentType)));
     require(CMS_set1_eContentType(message.get(), type.get()) == 1, "content type");
-    require(
-        CMS_add1_signer(message.get(), identity.certificate.get(), identity.key.get(), EVP_sha256(), flags),
-        "signer");
+    CMS_SignerInfo* const signer =
+        CMS_add1_signer(message.get(), identity.certificate.get(), identity.key.get(), EVP_sha256(), flags);
+    require(signer != nullptr, "signer");
+    if (pss)
+        require(
+            EVP_PKEY_CTX_set_rsa_padding(CMS_SignerInfo_get0_pkey_ctx(signer), RSA_PKCS1_PSS_PADDING) == 1,
+            "padding");
     require(CMS_final(message.get(), reader(content).get(), nullptr, flags) == 1, "signature");
     return message;
 }
@@ -107,31 +118,6 @@ void breakSignature(const Message& message) {
     bytes.back() ^= std::byte{1};
     ASN1_OCTET_STRING_set(value, static_cast<const unsigned char*>(static_cast<const void*>(bytes.data())),
                           static_cast<int>(bytes.size()));
-}
-
-/// The same element with indefinite lengths in its outer `levels` constructed levels. The input is DER of our
-/// own.
-Data withIndefiniteLengths(ByteView der, int levels) {
-    foundation::ByteWriter writer;
-    while (!der.empty()) {
-        const auto tag = std::to_integer<std::uint8_t>(der[0]);
-        const auto first = std::to_integer<std::size_t>(der[1]);
-        std::size_t length = first < 0x80 ? first : 0;
-        const std::size_t more = first < 0x80 ? 0 : first & 0x7FU;
-        for (std::size_t i = 0; i < more; ++i)
-            length = length << 8U | std::to_integer<std::size_t>(der[2 + i]);
-        const std::size_t header = 2 + more;
-        if ((tag & 0x20U) != 0 && levels > 0) {
-            writer.u8(tag)
-                .u8(0x80)
-                .bytes(withIndefiniteLengths(der.subspan(header, length), levels - 1))
-                .be16(0);
-        } else {
-            writer.bytes(der.first(header + length));
-        }
-        der = der.subspan(header + length);
-    }
-    return writer.data();
 }
 
 }  // namespace
@@ -223,6 +209,16 @@ CmsBuilder& CmsBuilder::withoutSignedAttributes() {
     return *this;
 }
 
+CmsBuilder& CmsBuilder::byKeyIdentifier() {
+    keyIdentifier_ = true;
+    return *this;
+}
+
+CmsBuilder& CmsBuilder::pss() {
+    pss_ = true;
+    return *this;
+}
+
 CmsBuilder& CmsBuilder::brokenSignature() {
     broken_ = true;
     return *this;
@@ -238,7 +234,8 @@ Data CmsBuilder::build() const {
     if (!attached_) flags |= CMS_DETACHED;
     if (!certificate_) flags |= CMS_NOCERTS;
     if (!signedAttributes_) flags |= CMS_NOATTR;
-    const Message message = signMessage(identityWith(key_), NID_pkcs7_data, content_, flags);
+    if (keyIdentifier_) flags |= CMS_USE_KEYID;
+    const Message message = signMessage(identityWith(key_), NID_pkcs7_data, content_, flags, pss_);
     CMS_SignerInfo* signer = signerOf(message);
     for (const TimestampBuilder& timestamp : timestamps_) {
         const Data token = timestamp.build(viewOf(CMS_SignerInfo_get0_signature(signer)));

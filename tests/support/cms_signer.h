@@ -68,6 +68,12 @@ class CmsBuilder {
     /// No signed attributes: the signature is over the content itself.
     CmsBuilder& withoutSignedAttributes();
 
+    /// The signer is named by the key identifier in the certificate.
+    CmsBuilder& byKeyIdentifier();
+
+    /// RSASSA-PSS; of an RSA key only.
+    CmsBuilder& pss();
+
     /// One bit of the signature value is wrong.
     CmsBuilder& brokenSignature();
 
@@ -83,6 +89,8 @@ class CmsBuilder {
     bool certificate_ = true;
     bool attached_ = false;
     bool signedAttributes_ = true;
+    bool keyIdentifier_ = false;
+    bool pss_ = false;
     bool broken_ = false;
     std::vector<TimestampBuilder> timestamps_;
 };

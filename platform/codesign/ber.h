@@ -1,0 +1,103 @@
+// Reading BER (ITU-T X.690) without a schema: the encoding of CMS messages.
+//
+//   element = tag, length, contents
+//   tag     first byte: class (2 bits), constructed (1 bit), number (5 bits); number 31 says that the number
+//           follows in base 128, bit 8 set in all digits but the last
+//   length  below 128: one byte; 0x80 + n: n bytes, big-endian, with or without leading zeros; 0x80 alone:
+//           indefinite, the contents end with the two bytes 00 00. Only constructed elements may have that.
+//
+// DER is BER with definite lengths in their shortest form, so a reader of the one reads the other.
+//
+// No element is looked into unless it is asked for: reading an element costs its header, or, with an
+// indefinite length, a pass over the headers inside it. Headers are counted, so that indefinite lengths
+// inside each other, each of which is such a pass, end at a limit.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+
+#include "foundation/bytes.h"
+
+namespace pinwell::codesign::ber {
+
+using foundation::ByteView;
+using foundation::Data;
+
+/// First bytes of elements: class, constructed bit and a number below 31.
+inline constexpr std::uint8_t kInteger = 0x02;
+inline constexpr std::uint8_t kBitString = 0x03;
+inline constexpr std::uint8_t kOctetString = 0x04;
+inline constexpr std::uint8_t kObjectIdentifier = 0x06;
+inline constexpr std::uint8_t kGeneralizedTime = 0x18;
+inline constexpr std::uint8_t kSequence = 0x30;
+inline constexpr std::uint8_t kSet = 0x31;
+inline constexpr std::uint8_t kConstructed = 0x20;
+
+/// `[number]` in a schema: constructed when it is explicit, or replaces the tag of a constructed type.
+constexpr std::uint8_t context(unsigned number, bool constructed = true) {
+    return static_cast<std::uint8_t>(0x80U | (constructed ? kConstructed : 0U) | number);
+}
+
+/// How deep elements of indefinite length may be nested, and how deep rewriting as DER descends. A message
+/// with a time-stamp token stays below 30.
+inline constexpr unsigned kMaximumNesting = 64;
+
+/// How deep the pieces of one string may be nested. They are all on one level in practice.
+inline constexpr std::size_t kMaximumStringNesting = 5;
+
+/// Most headers that are read of one message, repeated passes included. A signer's message has some 500.
+inline constexpr std::uint32_t kMaximumHeaders = 1'000'000;
+
+/// The headers read so far of one message, by all of its readers together.
+struct Work {
+    std::uint32_t headers = 0;
+};
+
+struct Element {
+    std::uint8_t tag = 0;  // the first byte; for a number above 30 one that equals no tag of a schema
+    ByteView wholeTag;     // as many bytes as it has
+    ByteView whole;        // tag, length, contents, and the end of an indefinite length
+    ByteView contents;
+
+    bool isConstructed() const noexcept { return (tag & kConstructed) != 0; }
+};
+
+/// A forward cursor over elements that stand end to end. It owns nothing. What is malformed throws CodeError
+/// (kInvalidSignature), and so does what a caller asks for and does not find; `what` names it, as in "the
+/// signer's version".
+class Reader {
+  public:
+    /// `work` must outlive the reader.
+    Reader(ByteView elements, Work& work) noexcept : rest_(elements), work_(&work) {}
+
+    bool atEnd() const noexcept { return rest_.empty(); }
+
+    /// The next element, of any tag.
+    Element next(const char* what);
+
+    /// The next element, which must have this tag.
+    Element expect(std::uint8_t tag, const char* what);
+
+    /// The next element if it has this tag; otherwise nullopt, and the reader has not moved.
+    std::optional<Element> nextIf(std::uint8_t tag, const char* what);
+
+    /// Throws unless all elements have been read.
+    void finish(const char* what) const;
+
+  private:
+    ByteView rest_;
+    Work* work_;
+};
+
+/// The octets of an OCTET STRING, or of an element whose tag stands in its place: the contents, or those of
+/// the strings that a constructed one consists of. Throws CodeError.
+Data octets(const Element& element, Work& work, const char* what);
+
+/// The element in DER as far as lengths go: all definite, all in their shortest form, OCTET STRINGs in one
+/// piece. The order in a SET stays. Throws CodeError.
+Data inDer(const Element& element, Work& work, const char* what);
+
+/// A definite element: tag, shortest length, contents.
+Data element(std::uint8_t tag, ByteView contents);
+
+}  // namespace pinwell::codesign::ber

@@ -1,0 +1,73 @@
+// A CMS SignedData message (RFC 5652), DER or BER, taken apart without a library.
+//
+//   ContentInfo  = { 1.2.840.113549.1.7.2, [0] SignedData }
+//   SignedData   = { version, SET of digest algorithms, { content type, [0] OCTET STRING, if not detached },
+//                    [0] certificates, [1] revocation lists, SET of signers }
+//   signer       = { version, issuer and serial number | [0] key identifier, digest algorithm,
+//                    [0] signed attributes, signature algorithm, signature, [1] unsigned attributes }
+//   attribute    = { type, SET of values }
+//
+// A library makes an object of every element and sets up a digest for every algorithm, whoever uses them; so
+// the work is bounded here, before any library sees a byte of the message. Refused: what is not of this shape
+// or has bytes after it, other versions than 1, 3, 4 and 5 (of a signer: 1 and 3), more than
+// kMaximumDigestAlgorithms, more or fewer than one signer, more than kMaximumCertificates, and a message that
+// takes more than ber::kMaximumHeaders to read. There is no limit on its length.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <vector>
+
+#include "codesign/ber.h"
+
+namespace pinwell::codesign {
+
+inline constexpr std::size_t kMaximumDigestAlgorithms = 8;
+inline constexpr std::size_t kMaximumCertificates = 64;
+
+/// An AlgorithmIdentifier.
+struct Algorithm {
+    foundation::ByteView identifier;  // contents of the OBJECT IDENTIFIER
+    foundation::ByteView parameters;  // the whole element; empty if there is none
+};
+
+/// What the choice of a signer's certificate and its key need of an X.509 certificate. Nothing is verified.
+struct MessageCertificate {
+    foundation::ByteView issuer;                    // the whole Name
+    foundation::ByteView serialNumber;              // contents of the INTEGER
+    foundation::ByteView publicKey;                 // the whole SubjectPublicKeyInfo
+    std::optional<foundation::Data> keyIdentifier;  // of the extension 2.5.29.14
+};
+
+struct MessageSigner {
+    foundation::ByteView issuer;                    // and serial number; empty if there is a key identifier
+    foundation::ByteView serialNumber;              // contents of the INTEGER
+    std::optional<foundation::Data> keyIdentifier;  // in the place of both
+    Algorithm digestAlgorithm;
+    std::optional<ber::Element> signedAttributes;
+    Algorithm signatureAlgorithm;
+    foundation::Data signature;
+    std::optional<ber::Element> unsignedAttributes;
+};
+
+/// A message. Its views are into the bytes that it was parsed from.
+struct SignedMessage {
+    std::vector<Algorithm> digestAlgorithms;
+    foundation::ByteView contentType;         // contents of the OBJECT IDENTIFIER
+    std::optional<foundation::Data> content;  // nullopt: detached
+    std::vector<MessageCertificate> certificates;
+    MessageSigner signer;
+};
+
+/// Reads a message that fills `bytes`. Throws CodeError.
+SignedMessage parseSignedMessage(foundation::ByteView bytes);
+
+/// The value of an attribute by its type, the contents of an OBJECT IDENTIFIER; nullopt unless `attributes`
+/// holds exactly one attribute of the type, with exactly one value. Throws CodeError if any is malformed.
+std::optional<ber::Element> soleValueOf(const ber::Element& attributes, foundation::ByteView type,
+                                        const char* what);
+
+/// An AlgorithmIdentifier, the next element of `reader`. Throws CodeError.
+Algorithm readAlgorithm(ber::Reader& reader, ber::Work& work, const char* what);
+
+}  // namespace pinwell::codesign
