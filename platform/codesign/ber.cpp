@@ -108,7 +108,7 @@ std::size_t indefiniteLength(ByteView bytes, Work& work, const char* what) {
 Data inDer(const Element& element, Work& work, const char* what, unsigned depth) {
     if (!element.isConstructed()) return withHeader(element.wholeTag, element.contents);
     if (element.tag == (kOctetString | kConstructed))
-        return ber::element(kOctetString, octets(element, work, what));
+        return makeElement(kOctetString, octets(element, work, what));
     if (depth == 0) refuse(std::string(what) + " is nested too deep");
     Data contents;
     for (Reader reader(element.contents, work); !reader.atEnd();)
@@ -173,7 +173,7 @@ Data inDer(const Element& element, Work& work, const char* what) {
     return inDer(element, work, what, kMaximumNesting);
 }
 
-Data element(std::uint8_t tag, ByteView contents) {
+Data makeElement(std::uint8_t tag, ByteView contents) {
     const auto first = static_cast<std::byte>(tag);
     return withHeader(ByteView(&first, 1), contents);
 }

@@ -98,6 +98,6 @@ Data octets(const Element& element, Work& work, const char* what);
 Data inDer(const Element& element, Work& work, const char* what);
 
 /// A definite element: tag, shortest length, contents.
-Data element(std::uint8_t tag, ByteView contents);
+Data makeElement(std::uint8_t tag, ByteView contents);
 
 }  // namespace pinwell::codesign::ber

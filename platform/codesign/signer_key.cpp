@@ -15,7 +15,6 @@
 
 namespace pinwell::codesign {
 
-using ber::Element;
 using ber::Reader;
 using ber::Work;
 using foundation::asBytes;

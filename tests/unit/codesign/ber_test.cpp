@@ -229,16 +229,16 @@ TEST(BerInDer, HasDefiniteShortestLengthsAndWholeStrings) {
 
 TEST(BerInDer, GoesNoDeeperThanTheLimit) {
     Data deep;
-    for (unsigned i = 0; i < kMaximumNesting; ++i) deep = element(kSequence, deep);
+    for (unsigned i = 0; i < kMaximumNesting; ++i) deep = makeElement(kSequence, deep);
     Work work;
     EXPECT_EQ(inDer(only(deep), work, "it"), deep);
-    deep = element(kSequence, deep);
+    deep = makeElement(kSequence, deep);
     EXPECT_THROW(inDer(only(deep), work, "it"), CodeError);
 }
 
 TEST(BerInDer, WritesEveryLengthAsItIsRead) {
     for (const std::size_t length : {0U, 127U, 128U, 255U, 256U, 65535U, 65536U}) {
-        const Data made = element(kOctetString, Data(length, std::byte{7}));
+        const Data made = makeElement(kOctetString, Data(length, std::byte{7}));
         EXPECT_EQ(only(made).contents.size(), length);
         EXPECT_EQ(only(made).whole.size(), made.size());
     }
