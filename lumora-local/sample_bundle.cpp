@@ -15,7 +15,7 @@ using foundation::Data;
 using foundation::Dictionary;
 
 constexpr std::string_view kName = "Sample";
-constexpr std::string_view kIdentifier = "example.lumora.sample";
+constexpr std::string_view kBundleIdentifier = "example.lumora.sample";
 
 // Executable image. The text segment is one alignment unit long; the signature follows it.
 constexpr std::uint32_t kImageMagic64 = 0xFEEDFACF;
@@ -142,12 +142,12 @@ std::string writeSampleApplication(const std::string& directory) {
     const std::string name(kName);
     const SealedComponents components{
         .informationPropertyList = propertyListDocument({{"CFBundleExecutable", name},
-                                                         {"CFBundleIdentifier", kIdentifier},
+                                                         {"CFBundleIdentifier", kBundleIdentifier},
                                                          {"CFBundleName", name},
                                                          {"CFBundlePackageType", "APPL"},
                                                          {"CFBundleVersion", "1"}}),
         .resourceSeal = propertyListDocument({{"files", Dictionary{}}, {"files2", Dictionary{}}})};
-    const std::string identifier(kIdentifier);
+    const std::string identifier(kBundleIdentifier);
     const Data executable = makeUniversalImage({
         {kCpuTypeX86_64, makeSignedImage(kCpuTypeX86_64, identifier, components)},
         {kCpuTypeArm64, makeSignedImage(kCpuTypeArm64, identifier, components)},

@@ -20,7 +20,7 @@ using foundation::ByteWriter;
 using foundation::Data;
 using foundation::Dictionary;
 
-constexpr std::string_view kIdentifier = "example.lumora.sample.image";
+constexpr std::string_view kImageIdentifier = "example.lumora.sample.image";
 constexpr std::string_view kText = "A sample disk image, to try a record service with.\r\n";
 constexpr std::string_view kPartition = "Sample (DOS_FAT_12 : 0)";
 
@@ -135,7 +135,7 @@ Data makeDiskImage(ImageSignature signature) {
     image.bytes(fork.bytes.data()).bytes(list);
     Data superblob;
     if (signature == ImageSignature::adHoc) {
-        superblob = AdHocSignature{.identifier = std::string(kIdentifier),
+        superblob = AdHocSignature{.identifier = std::string(kImageIdentifier),
                                    .code = image.data(),
                                    .components = {{kTrailerSlot, trailer.bytes(0)}}}
                         .superblob();

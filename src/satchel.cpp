@@ -28,9 +28,6 @@ using foundation::Dictionary;
 using foundation::Error;
 using foundation::Value;
 
-constexpr std::int32_t kAccepted = 0;
-constexpr std::int32_t kRefused = -1;
-
 // A caller's mistake rather than a file's fault: no buffer can lie there.
 bool wrapsAddressSpace(const std::byte* start, std::uint64_t length) {
     return length > std::numeric_limits<std::uintptr_t>::max() - std::bit_cast<std::uintptr_t>(start);

@@ -1,9 +1,13 @@
-// The first rule of a format that some bytes break, and where: what a refusal is explained with.
+// What the functions of the ticket formats return, and the rule that explains a refusal.
 #pragma once
 
 #include <cstdint>
 
 namespace pinwell {
+
+/// Results of the ticket functions that return a number.
+inline constexpr std::int32_t kAccepted = 0;
+inline constexpr std::int32_t kRefused = -1;
 
 struct ticket_fault {
     /// From the start of the bytes that were looked at.

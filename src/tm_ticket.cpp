@@ -40,9 +40,6 @@ using foundation::asBytes;
 using foundation::ByteReader;
 using foundation::ByteView;
 
-constexpr std::int32_t kAccepted = 0;
-constexpr std::int32_t kRefused = -1;
-
 constexpr std::uint16_t kVersionWithoutAlgorithms = 1;
 constexpr std::uint16_t kVersionWithAlgorithms = 2;
 

@@ -103,14 +103,14 @@ class Builder {
     std::optional<Error> error_;
 };
 
-struct Unserializable {
+struct NotInJSON {
     std::string_view what;
 };
 
 Library toLibrary(const Value& value, unsigned depth);
 
 Library containerToLibrary(const Value& value, unsigned depth) {
-    if (depth == kMaximumJSONDepth) throw Unserializable{"values nested this deep"};
+    if (depth == kMaximumJSONDepth) throw NotInJSON{"values nested this deep"};
     if (const Dictionary* members = value.dictionary()) {
         Library object = Library::object();
         for (const auto& [key, member] : *members) object[key] = toLibrary(member, depth + 1);
@@ -127,12 +127,12 @@ Library toLibrary(const Value& value, unsigned depth) {
     if (const auto* number = value.integer()) return *number;
     if (const auto* number = value.unsignedInteger()) return *number;
     if (const double* number = value.real()) {
-        if (!std::isfinite(*number)) throw Unserializable{"a number that is not finite"};
+        if (!std::isfinite(*number)) throw NotInJSON{"a number that is not finite"};
         return *number;
     }
     if (const std::string* text = value.string()) return *text;
     if (value.array() != nullptr || value.dictionary() != nullptr) return containerToLibrary(value, depth);
-    throw Unserializable{"a value of this kind"};
+    throw NotInJSON{"a value of this kind"};
 }
 
 }  // namespace
@@ -154,7 +154,7 @@ Result<Data> serializeJSON(const Value& value) {
                      "The top level of JSON must be an object or an array.");
     try {
         return toData(std::string_view(toLibrary(value, 0).dump()));
-    } catch (const Unserializable& reason) {
+    } catch (const NotInJSON& reason) {
         return Error(kDataErrorDomain, kUnrepresentableValue,
                      fmt::format("JSON cannot hold {}.", reason.what));
     } catch (const Library::type_error&) {

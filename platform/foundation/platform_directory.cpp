@@ -18,11 +18,11 @@ namespace {
 constexpr std::size_t kLongestHostName = 253;  // RFC 1035, section 2.3.4, as text
 constexpr std::size_t kLongestLabel = 63;
 
-bool isDigit(char c) {
+bool isASCIIDigit(char c) {
     return c >= '0' && c <= '9';
 }
 bool isLetterOrDigit(char c) {
-    return isDigit(c) || (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
+    return isASCIIDigit(c) || (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
 }
 
 bool isAddress(int family, std::string_view text) {
@@ -40,7 +40,7 @@ bool isLabel(std::string_view label) {
 bool isHostName(std::string_view host) {
     if (host.size() > kLongestHostName) return false;
     const std::string_view last = host.substr(host.rfind('.') + 1);
-    if (!last.empty() && std::all_of(last.begin(), last.end(), isDigit)) return isAddress(AF_INET, host);
+    if (!last.empty() && std::all_of(last.begin(), last.end(), isASCIIDigit)) return isAddress(AF_INET, host);
     while (true) {
         const std::size_t dot = host.find('.');
         if (!isLabel(host.substr(0, dot))) return false;
@@ -50,7 +50,7 @@ bool isHostName(std::string_view host) {
 }
 
 bool isPort(std::string_view port) {
-    if (port.empty() || port.size() > 5 || !std::all_of(port.begin(), port.end(), isDigit)) return false;
+    if (port.empty() || port.size() > 5 || !std::all_of(port.begin(), port.end(), isASCIIDigit)) return false;
     const int number = std::stoi(std::string(port));
     return number >= 1 && number <= 65535;
 }

@@ -105,7 +105,7 @@ Value fromNode(plist_t node) {
     }
 }
 
-struct Unserializable {
+struct NotInAPropertyList {
     std::string_view what;
 };
 
@@ -114,14 +114,15 @@ const char* xmlText(const std::string& text) {
     const bool isPlain = std::none_of(text.begin(), text.end(), [](char c) {
         return static_cast<unsigned char>(c) < 0x20 && c != '\n' && c != '\t' && c != '\r';
     });
-    if (!isPlain || !isUTF8(text)) throw Unserializable{"text with control characters, or that is not UTF-8"};
+    if (!isPlain || !isUTF8(text))
+        throw NotInAPropertyList{"text with control characters, or that is not UTF-8"};
     return text.c_str();
 }
 
 Node toNode(const Value& value, unsigned depth);
 
 Node containerToNode(const Value& value, unsigned depth) {
-    if (depth == kMaximumPropertyListDepth) throw Unserializable{"values nested this deep"};
+    if (depth == kMaximumPropertyListDepth) throw NotInAPropertyList{"values nested this deep"};
     if (const Array* elements = value.array()) {
         Node array(plist_new_array());
         for (const Value& element : *elements)
@@ -141,11 +142,11 @@ Node toNode(const Value& value, unsigned depth) {
     if (const auto* number = value.integer())
         return Node(plist_new_uint(static_cast<std::uint64_t>(*number)));
     if (const auto* number = value.unsignedInteger()) {
-        if (!std::in_range<std::int64_t>(*number)) throw Unserializable{"an integer above 63 bits"};
+        if (!std::in_range<std::int64_t>(*number)) throw NotInAPropertyList{"an integer above 63 bits"};
         return Node(plist_new_uint(*number));
     }
     if (const double* number = value.real()) {
-        if (!std::isfinite(*number)) throw Unserializable{"a number that is not finite"};
+        if (!std::isfinite(*number)) throw NotInAPropertyList{"a number that is not finite"};
         return Node(plist_new_real(*number));
     }
     if (const std::string* text = value.string()) return Node(plist_new_string(xmlText(*text)));
@@ -154,7 +155,7 @@ Node toNode(const Value& value, unsigned depth) {
         return Node(plist_new_data(bytes.data(), bytes.size()));
     }
     if (value.array() != nullptr || value.dictionary() != nullptr) return containerToNode(value, depth);
-    throw Unserializable{"a value of this kind"};
+    throw NotInAPropertyList{"a value of this kind"};
 }
 
 }  // namespace
@@ -190,9 +191,9 @@ Result<Data> serializePropertyList(const Value& value) {
         std::uint32_t length = 0;
         plist_to_xml(root.get(), &raw, &length);
         const Text xml(raw);
-        if (xml == nullptr) throw Unserializable{"this value"};
+        if (xml == nullptr) throw NotInAPropertyList{"this value"};
         return toData(std::string_view(xml.get(), length));
-    } catch (const Unserializable& reason) {
+    } catch (const NotInAPropertyList& reason) {
         return Error(kDataErrorDomain, kUnrepresentableValue,
                      fmt::format("A property list cannot hold {}.", reason.what));
     }

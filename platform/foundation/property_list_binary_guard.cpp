@@ -32,23 +32,23 @@ struct Extent {
     std::uint64_t contents = 0;  // bytes
 };
 
-struct Refusal {
+struct BinaryRefusal {
     std::int64_t code;
     std::string text;
 };
 
 [[noreturn]] void refuse(std::size_t offset, std::string_view what) {
-    throw Refusal{kMalformedDocument,
-                  fmt::format("The binary property list is malformed at byte {}: {}.", offset, what)};
+    throw BinaryRefusal{kMalformedDocument,
+                        fmt::format("The binary property list is malformed at byte {}: {}.", offset, what)};
 }
 
 [[noreturn]] void refuseSize(std::string_view what) {
-    throw Refusal{kExcessiveDocument, fmt::format("The binary property list {}.", what)};
+    throw BinaryRefusal{kExcessiveDocument, fmt::format("The binary property list {}.", what)};
 }
 
-class Guard {
+class BinaryGuard {
   public:
-    explicit Guard(ByteView document) : document_(document) {}
+    explicit BinaryGuard(ByteView document) : document_(document) {}
 
     void check() {
         readTrailer();
@@ -81,7 +81,7 @@ class Guard {
     std::vector<Extent> known_;     // by object; height 0 means not measured yet
 };
 
-void Guard::readTrailer() {
+void BinaryGuard::readTrailer() {
     ByteReader whole(document_);
     whole.skip(kBinaryPropertyListMagic.size(), "header");
     if (whole.remaining() < kTrailerSize) refuse(whole.position(), "no room for the trailer");
@@ -104,7 +104,7 @@ void Guard::readTrailer() {
     known_.resize(static_cast<std::size_t>(count));
 }
 
-ByteReader Guard::readerAt(std::uint64_t object) {
+ByteReader BinaryGuard::readerAt(std::uint64_t object) {
     ByteReader table(document_);
     table.seek(tableOffset_ + object * offsetWidth_, "offset table");
     const std::uint64_t offset = sized(table, offsetWidth_, "object offset");
@@ -115,7 +115,7 @@ ByteReader Guard::readerAt(std::uint64_t object) {
     return reader;
 }
 
-std::uint64_t Guard::readLength(ByteReader& reader, unsigned low) {
+std::uint64_t BinaryGuard::readLength(ByteReader& reader, unsigned low) {
     if (low != kLengthFollows) return low;
     const unsigned marker = reader.u8("length marker");
     if (marker >> 4U != static_cast<unsigned>(Kind::integer) || (marker & 0xFU) > 3)
@@ -124,7 +124,7 @@ std::uint64_t Guard::readLength(ByteReader& reader, unsigned low) {
 }
 
 // The library aborts the process on a key with a zero character in it.
-void Guard::requireKey(std::uint64_t object) {
+void BinaryGuard::requireKey(std::uint64_t object) {
     if (object >= known_.size()) refuse(0, "reference to no object");
     ByteReader reader = readerAt(object);
     const std::size_t at = reader.position();
@@ -140,7 +140,7 @@ void Guard::requireKey(std::uint64_t object) {
     }
 }
 
-void Guard::checkLeaf(ByteReader& reader, Kind kind, unsigned low) {
+void BinaryGuard::checkLeaf(ByteReader& reader, Kind kind, unsigned low) {
     const std::size_t at = reader.position() - 1;
     switch (kind) {
         case Kind::simple:
@@ -163,7 +163,8 @@ void Guard::checkLeaf(ByteReader& reader, Kind kind, unsigned low) {
     }
 }
 
-Extent Guard::measureContainer(ByteReader& reader, std::uint64_t count, bool isDictionary, unsigned depth) {
+Extent BinaryGuard::measureContainer(ByteReader& reader, std::uint64_t count, bool isDictionary,
+                                     unsigned depth) {
     if (count > reader.remaining() / (isDictionary ? 2U : 1U) / referenceWidth_)
         refuse(reader.position(), "more references than bytes");
     const std::uint64_t references = isDictionary ? 2 * count : count;
@@ -185,7 +186,7 @@ Extent Guard::measureContainer(ByteReader& reader, std::uint64_t count, bool isD
 }
 
 // Recursion is bounded by the depth limit, which a cycle runs into as well.
-Extent Guard::measure(std::uint64_t object, unsigned depth) {
+Extent BinaryGuard::measure(std::uint64_t object, unsigned depth) {
     if (object >= known_.size()) refuse(0, "reference to no object");
     Extent& known = known_[static_cast<std::size_t>(object)];
     if (depth + (known.height == 0 ? 1 : known.height) > kMaximumPropertyListDepth + 2)
@@ -214,9 +215,9 @@ Extent Guard::measure(std::uint64_t object, unsigned depth) {
 
 std::optional<Error> refuseBinaryPropertyList(ByteView document) {
     try {
-        Guard(document).check();
+        BinaryGuard(document).check();
         return std::nullopt;
-    } catch (const Refusal& refusal) {
+    } catch (const BinaryRefusal& refusal) {
         return Error(kDataErrorDomain, refusal.code, refusal.text);
     } catch (const ShortRead& shortage) {
         return Error(kDataErrorDomain, kMalformedDocument,

@@ -24,16 +24,16 @@ bool contains(const std::array<std::string_view, N>& names, std::string_view nam
     return std::find(names.begin(), names.end(), name) != names.end();
 }
 
-struct Refusal {
+struct XMLRefusal {
     std::int64_t code;
     std::string text;
 };
 
 // Walks the markup, and only the markup. It accepts less than XML does (no quoted angle brackets in a tag, no
 // marked section outside text), so that what it and the library take for a tag is the same.
-class Guard {
+class XMLGuard {
   public:
-    explicit Guard(std::string_view document) : document_(document) {}
+    explicit XMLGuard(std::string_view document) : document_(document) {}
 
     void check() {
         if (const std::size_t zero = document_.find('\0'); zero != std::string_view::npos)
@@ -57,8 +57,8 @@ class Guard {
 
   private:
     [[noreturn]] static void refuse(std::size_t offset, std::string_view what) {
-        throw Refusal{kMalformedDocument,
-                      fmt::format("The property list is malformed at byte {}: {}.", offset, what)};
+        throw XMLRefusal{kMalformedDocument,
+                         fmt::format("The property list is malformed at byte {}: {}.", offset, what)};
     }
 
     bool inLeaf() const { return !open_.empty() && contains(kLeaves, open_.back()); }
@@ -139,11 +139,11 @@ class Guard {
         if (!contains(kContainers, name) && !contains(kLeaves, name)) refuse(at_, "unknown element");
         if (inLeaf()) refuse(at_, "an element inside text");
         if (name != "plist" && ++values_ > kMaximumPropertyListValues)
-            throw Refusal{kExcessiveDocument, "The property list holds too many values."};
+            throw XMLRefusal{kExcessiveDocument, "The property list holds too many values."};
         if (isEmpty) return;
         // The document's own element and the innermost leaf do not count as nesting.
         if (open_.size() >= kMaximumPropertyListDepth + 2)
-            throw Refusal{kExcessiveDocument, "The property list is nested too deeply."};
+            throw XMLRefusal{kExcessiveDocument, "The property list is nested too deeply."};
         open_.push_back(name);
     }
 
@@ -164,9 +164,9 @@ class Guard {
 std::optional<Error> refuseXMLPropertyList(ByteView document) {
     const std::string text = toString(document);
     try {
-        Guard(text).check();
+        XMLGuard(text).check();
         return std::nullopt;
-    } catch (const Refusal& refusal) {
+    } catch (const XMLRefusal& refusal) {
         return Error(kDataErrorDomain, refusal.code, refusal.text);
     }
 }

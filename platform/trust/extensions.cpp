@@ -119,7 +119,7 @@ struct Reader {
     std::string_view oid;
     bool (*read)(X509_EXTENSION*, CertificateExtensions&);
 };
-constexpr std::array kReaders{
+constexpr std::array kExtensionReaders{
     Reader{kBasicConstraintsOid, readBasicConstraints},
     Reader{kKeyUsageOid, readKeyUsage},
     Reader{kPurposesOid, readPurposes},
@@ -129,9 +129,9 @@ constexpr std::array kReaders{
 };
 
 const Reader* readerFor(std::string_view oid) {
-    const auto* const found = std::find_if(kReaders.begin(), kReaders.end(),
+    const auto* const found = std::find_if(kExtensionReaders.begin(), kExtensionReaders.end(),
                                            [&](const Reader& reader) { return reader.oid == oid; });
-    return found == kReaders.end() ? nullptr : found;
+    return found == kExtensionReaders.end() ? nullptr : found;
 }
 
 }  // namespace

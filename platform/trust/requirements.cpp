@@ -57,7 +57,7 @@ struct OptionReader {
     std::string_view key;
     bool (*read)(const Value& value, Requirements& into);
 };
-constexpr std::array kReaders{
+constexpr std::array kRequirementReaders{
     OptionReader{option::kCriticalExtensions,
                  [](const Value& v, Requirements& r) { return readSwitch(v, r.criticalExtensions); }},
     OptionReader{option::kIdLinkage,
@@ -105,9 +105,9 @@ Result<Requirements> readRequirements(const Dictionary& options) {
     Requirements requirements;
     for (const auto& [key, value] : options) {
         const auto* const reader =
-            std::find_if(kReaders.begin(), kReaders.end(),
+            std::find_if(kRequirementReaders.begin(), kRequirementReaders.end(),
                          [&wanted = key](const OptionReader& entry) { return entry.key == wanted; });
-        if (reader == kReaders.end())
+        if (reader == kRequirementReaders.end())
             return refusal(foundation::format("the policy option %@ is not known", key));
         if (!reader->read(value, requirements)) {
             return refusal(foundation::format("the policy option %@ has a value of the wrong type", key));

@@ -17,7 +17,7 @@ namespace {
 
 using foundation::Data;
 
-constexpr std::size_t kPieceSize = std::size_t{64} * 1024;
+constexpr std::size_t kDigestedAtOnce = std::size_t{64} * 1024;
 
 template <class Call>
 auto uninterrupted(Call call) {
@@ -93,7 +93,7 @@ bool Archive::readTable(const Header& header) {
     std::uint64_t at = header.size;
     std::uint64_t rest = header.compressedLength;
     while (rest > 0) {
-        const auto piece = read(at, static_cast<std::size_t>(std::min<std::uint64_t>(rest, kPieceSize)));
+        const auto piece = read(at, static_cast<std::size_t>(std::min<std::uint64_t>(rest, kDigestedAtOnce)));
         if (!piece || !inflater.feed(*piece)) return false;
         digest.update(*piece);
         at += piece->size();

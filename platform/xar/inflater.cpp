@@ -10,7 +10,7 @@
 namespace pinwell::xar {
 namespace {
 
-constexpr std::size_t kPieceSize = std::size_t{32} * 1024;
+constexpr std::size_t kInflatedAtOnce = std::size_t{32} * 1024;
 
 }  // namespace
 
@@ -23,8 +23,8 @@ struct Inflater::Stream {
     Stream& operator=(const Stream&) = delete;
 
     z_stream state{};
-    std::array<Bytef, kPieceSize> in{};
-    std::array<Bytef, kPieceSize> out{};
+    std::array<Bytef, kInflatedAtOnce> in{};
+    std::array<Bytef, kInflatedAtOnce> out{};
 };
 
 Inflater::Inflater(std::uint64_t limit, Sink sink)
@@ -35,7 +35,7 @@ Inflater::~Inflater() = default;
 bool Inflater::feed(foundation::ByteView compressed) {
     z_stream& state = stream_->state;
     while (!compressed.empty() && !complete_) {
-        const auto piece = compressed.first(std::min(compressed.size(), kPieceSize));
+        const auto piece = compressed.first(std::min(compressed.size(), kInflatedAtOnce));
         compressed = compressed.subspan(piece.size());
         std::transform(piece.begin(), piece.end(), stream_->in.begin(),
                        [](std::byte byte) { return std::to_integer<Bytef>(byte); });
@@ -43,12 +43,13 @@ bool Inflater::feed(foundation::ByteView compressed) {
         state.avail_in = static_cast<uInt>(piece.size());
         do {
             state.next_out = stream_->out.data();
-            state.avail_out = kPieceSize;
+            state.avail_out = kInflatedAtOnce;
             const int status = inflate(&state, Z_NO_FLUSH);
             if (status != Z_OK && status != Z_STREAM_END && status != Z_BUF_ERROR) return false;
             complete_ = status == Z_STREAM_END;
 
-            const auto contents = std::as_bytes(std::span(stream_->out)).first(kPieceSize - state.avail_out);
+            const auto contents =
+                std::as_bytes(std::span(stream_->out)).first(kInflatedAtOnce - state.avail_out);
             if (contents.size() > remaining_) return false;
             remaining_ -= contents.size();
             if (!contents.empty() && !sink_(contents)) return false;

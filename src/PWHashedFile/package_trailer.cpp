@@ -16,7 +16,7 @@ using foundation::ByteView;
 
 constexpr std::string_view kTrailerMagic = "t8lr";
 
-constexpr std::size_t kVersionOffset = 4;
+constexpr std::size_t kTrailerVersionOffset = 4;
 constexpr std::size_t kTypeOffset = 6;
 constexpr std::size_t kLengthOffset = 8;
 constexpr unsigned kTypeShift = 8 * kTypeOffset;  // of the type in the record's first word
@@ -33,7 +33,7 @@ std::string trailer_header::magic() const {
     return foundation::toString(ByteView(bytes).first(kTrailerMagic.size()));
 }
 std::uint16_t trailer_header::version() const {
-    return readerAt(*this, kVersionOffset).le16("version");
+    return readerAt(*this, kTrailerVersionOffset).le16("version");
 }
 std::uint16_t trailer_header::type() const {
     return readerAt(*this, kTypeOffset).le16("type");

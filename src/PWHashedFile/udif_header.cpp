@@ -11,7 +11,7 @@ using foundation::ByteReader;
 
 namespace {
 
-constexpr std::size_t kVersionOffset = 4;
+constexpr std::size_t kUDIFVersionOffset = 4;
 constexpr std::size_t kCodeSignLengthOffset = 304;
 
 ByteReader readerAt(foundation::ByteView header, std::size_t offset) {
@@ -37,7 +37,7 @@ std::uint32_t UDIFFileHeader::magicAsShown() const {
 }
 
 std::uint32_t UDIFFileHeader::version() const {
-    return readerAt(bytes_, kVersionOffset).be32("fUDIFVersion");
+    return readerAt(bytes_, kUDIFVersionOffset).be32("fUDIFVersion");
 }
 
 std::uint64_t UDIFFileHeader::codeSignOffset() const {

@@ -34,7 +34,8 @@ using testing::MatchesRegex;
 using testing::Values;
 
 constexpr std::size_t kBlock = 4096;
-constexpr std::size_t kDataSize = 64 * kBlock + 1000;  // more than a file system keeps among its own records
+constexpr std::size_t kVolumeDataSize =
+    64 * kBlock + 1000;  // more than a file system keeps among its own records
 constexpr const char* kAccessControlList = "system.posix_acl_access";
 
 /// Where on its volume a byte of a file lies.
@@ -90,7 +91,7 @@ class Volumes : public EndToEndTest, public testing::WithParamInterface<std::tup
   protected:
     void SetUp() override {
         if (volume.missing()) GTEST_SKIP() << *volume.missing();
-        artefact = std::get<Maker>(GetParam())(irregularData(kDataSize));
+        artefact = std::get<Maker>(GetParam())(irregularData(kVolumeDataSize));
         artefact = writeArtefact(artefact, volume / artefact.name);
         ticket = sealed(artefact.payload());
     }
@@ -285,7 +286,8 @@ using FullPlainVolume = FullVolume;
 
 TEST_P(FullPlainVolume, LosesNoneOfTheArtefactsOwnData) {
     EXPECT_THAT(stapleArtefact(), FailedToWrite());
-    EXPECT_EQ(readFile(artefact.path).substr(0, kDataSize), artefact.contents.substr(0, kDataSize));
+    EXPECT_EQ(readFile(artefact.path).substr(0, kVolumeDataSize),
+              artefact.contents.substr(0, kVolumeDataSize));
     EXPECT_THAT(names(), ElementsAre(artefact.name, "filling"));
 }
 

@@ -14,10 +14,10 @@
 
 #include <map>
 #include <mutex>
-#include <stdexcept>
 
 #include "foundation/byte_writer.h"
 #include "foundation/handle.h"
+#include "support/require.h"
 #include "support/ticket_builder.h"
 #include "trust/der.h"
 
@@ -40,10 +40,6 @@ using KeyContextHandle = Handle<EVP_PKEY_CTX, EVP_PKEY_CTX_free>;
 using NameHandle = Handle<X509_NAME, X509_NAME_free>;
 using ObjectHandle = Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
 using OctetsHandle = Handle<ASN1_OCTET_STRING, ASN1_OCTET_STRING_free>;
-
-void require(bool success, const char* what) {
-    if (!success) throw std::runtime_error(std::string("certificate builder: ") + what);
-}
 
 const unsigned char* unsignedBytes(const std::byte* bytes) {
     return static_cast<const unsigned char*>(static_cast<const void*>(bytes));

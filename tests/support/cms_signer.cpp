@@ -8,11 +8,10 @@
 #include <openssl/x509.h>
 #include <openssl/x509v3.h>
 
-#include <stdexcept>
-
 #include "foundation/handle.h"
 #include "support/cms_parts.h"
 #include "support/code_directory_builder.h"
+#include "support/require.h"
 
 namespace pinwell::test {
 
@@ -29,10 +28,6 @@ using Algorithm = foundation::Handle<X509_ALGOR, X509_ALGOR_free>;
 using Integer = foundation::Handle<ASN1_INTEGER, ASN1_INTEGER_free>;
 using Time = foundation::Handle<ASN1_GENERALIZEDTIME, ASN1_GENERALIZEDTIME_free>;
 using Object = foundation::Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
-
-void require(bool done, const char* what) {
-    if (!done) throw std::runtime_error(std::string("cannot make a test signature: ") + what);
-}
 
 struct Identity {
     Key key;

@@ -35,10 +35,6 @@ std::uint32_t headerSize(std::uint32_t version) {
     return 44;
 }
 
-std::uint32_t u32(std::size_t value) {
-    return static_cast<std::uint32_t>(value);
-}
-
 }  // namespace
 
 Data codeDigest(std::uint8_t type, ByteView bytes) {

@@ -13,6 +13,11 @@
 
 namespace pinwell::test {
 
+/// A size as a field of 32 bits. Test data are small enough.
+inline std::uint32_t u32(std::size_t value) {
+    return static_cast<std::uint32_t>(value);
+}
+
 using foundation::ByteView;
 using foundation::Data;
 

@@ -11,10 +11,6 @@ using foundation::ByteWriter;
 
 namespace {
 
-std::uint32_t u32(std::size_t value) {
-    return static_cast<std::uint32_t>(value);
-}
-
 /// Writes 32-bit numbers in the order of one image.
 class OrderedWriter {
   public:

@@ -19,13 +19,13 @@
 #include <csignal>
 #include <deque>
 #include <mutex>
-#include <stdexcept>
 #include <system_error>
 #include <thread>
 
 #include "foundation/file_io.h"
 #include "foundation/handle.h"
 #include "support/certificate_builder.h"
+#include "support/require.h"
 
 namespace pinwell::test {
 namespace {
@@ -42,11 +42,7 @@ using ContextHandle = foundation::Handle<SSL_CTX, SSL_CTX_free>;
 using ConnectionHandle = foundation::Handle<SSL, SSL_free>;
 using CertificateHandle = foundation::Handle<X509, X509_free>;
 using KeyHandle = foundation::Handle<EVP_PKEY, EVP_PKEY_free>;
-using BioHandle = foundation::Handle<BIO, BIO_free>;
-
-void require(bool condition, const char* what) {
-    if (!condition) throw std::runtime_error(std::string("hostile server: ") + what);
-}
+using MemoryBio = foundation::Handle<BIO, BIO_free>;
 
 bool equalsWithoutCase(std::string_view a, std::string_view b) {
     return a.size() == b.size() && strncasecmp(a.data(), b.data(), a.size()) == 0;
@@ -58,19 +54,19 @@ std::optional<std::string> findHeader(const HeaderList& headers, std::string_vie
     return std::nullopt;
 }
 
-BioHandle bioOf(const std::string& text) {
-    return BioHandle(BIO_new_mem_buf(text.data(), static_cast<int>(text.size())));
+MemoryBio bioOf(const std::string& text) {
+    return MemoryBio(BIO_new_mem_buf(text.data(), static_cast<int>(text.size())));
 }
 
 void useIdentity(SSL_CTX* context, const ServerIdentity& identity) {
-    const BioHandle chain = bioOf(identity.certificateChain);
+    const MemoryBio chain = bioOf(identity.certificateChain);
     const CertificateHandle leaf(PEM_read_bio_X509(chain.get(), nullptr, nullptr, nullptr));
     require(leaf != nullptr, "no certificate in the chain");
     require(SSL_CTX_use_certificate(context, leaf.get()) == 1, "the leaf certificate cannot be used");
     while (const CertificateHandle next{PEM_read_bio_X509(chain.get(), nullptr, nullptr, nullptr)})
         require(SSL_CTX_add1_chain_cert(context, next.get()) == 1, "a chain certificate cannot be used");
     ERR_clear_error();  // the end of the text is an error there
-    const BioHandle keyText = bioOf(identity.privateKey);
+    const MemoryBio keyText = bioOf(identity.privateKey);
     const KeyHandle key(PEM_read_bio_PrivateKey(keyText.get(), nullptr, nullptr, nullptr));
     require(key && SSL_CTX_use_PrivateKey(context, key.get()) == 1, "the private key cannot be used");
 }

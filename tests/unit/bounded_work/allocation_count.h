@@ -8,6 +8,9 @@
 
 namespace pinwell::test {
 
+inline constexpr std::size_t kKibibyte = 1024;
+inline constexpr std::size_t kMebibyte = 1024 * kKibibyte;
+
 class AllocationCount {
   public:
     AllocationCount();

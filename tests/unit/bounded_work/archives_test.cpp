@@ -7,6 +7,7 @@
 #include "allocation_count.h"
 #include "support/archive_builder.h"
 #include "support/temporary_directory.h"
+#include "support/text.h"
 #include "xar/archive.h"
 #include "xar/inflater.h"
 #include "xar/table_of_contents.h"
@@ -15,14 +16,6 @@ namespace pinwell::test {
 namespace {
 
 using foundation::asBytes;
-
-constexpr std::size_t kMebibyte = std::size_t{1024} * 1024;
-
-std::string repeated(std::string_view text, std::size_t count) {
-    std::string all;
-    for (std::size_t i = 0; i < count; ++i) all += text;
-    return all;
-}
 
 std::string inTable(const std::string& contents) {
     return "<xar><toc>" + contents + "</toc></xar>";

@@ -5,6 +5,7 @@
 #include "foundation/description.h"
 #include "foundation/json.h"
 #include "foundation/property_list.h"
+#include "support/text.h"
 
 namespace pinwell::test {
 namespace {
@@ -13,16 +14,8 @@ using foundation::asBytes;
 using foundation::parseJSON;
 using foundation::parsePropertyList;
 
-constexpr std::size_t kMebibyte = std::size_t{1024} * 1024;
-
 // A container or value is some hundred bytes, and a list of them grows by doubling.
 constexpr std::size_t kBytesPerValue = 1024;
-
-std::string repeated(std::string_view text, std::size_t count) {
-    std::string all;
-    for (std::size_t i = 0; i < count; ++i) all += text;
-    return all;
-}
 
 TEST(BoundedWork, JSONNestedAMillionDeepIsLeftAtTheLimit) {
     for (const auto* const opening : {"[", "{\"a\":"}) {

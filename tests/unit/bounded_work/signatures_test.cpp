@@ -19,9 +19,6 @@ using codesign::CodeError;
 using foundation::ByteWriter;
 using foundation::ShortRead;
 
-constexpr std::size_t kKibibyte = 1024;
-constexpr std::size_t kMebibyte = 1024 * kKibibyte;
-
 // Enough to say what is wrong.
 constexpr std::size_t kRefusal = 4 * kKibibyte;
 

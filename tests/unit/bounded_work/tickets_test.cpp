@@ -13,8 +13,6 @@ namespace {
 
 using foundation::Data;
 
-constexpr std::size_t kMebibyte = std::size_t{1024} * 1024;
-
 TEST(BoundedWork, TicketOfTheMostEntriesTakesOneBlockOfItsSize) {
     constexpr std::size_t kEntries = (kTicketMaximumSize - kTicketHeaderSize) / 20;
     const Data payload =

@@ -9,16 +9,6 @@ namespace {
 
 using codesign::kSuccess;
 
-Data codeDirectoryNamed(const std::string& identifier) {
-    return CodeDirectoryBuilder().identifier(identifier).build();
-}
-
-Data imageNamed(const std::string& identifier) {
-    return ExecutableImageBuilder()
-        .signature(SuperBlobBuilder::adHoc(codeDirectoryNamed(identifier)).build())
-        .build();
-}
-
 /// Valid in form, but neither ad hoc nor signed by anybody.
 Data invalidImage() {
     const Data codeDirectory = CodeDirectoryBuilder().flags(0).build();

@@ -22,6 +22,16 @@ struct Answer {
     codesign::SigningInformation information;
 };
 
+inline foundation::Data codeDirectoryNamed(const std::string& identifier) {
+    return CodeDirectoryBuilder().identifier(identifier).build();
+}
+
+inline foundation::Data imageNamed(const std::string& identifier) {
+    return ExecutableImageBuilder()
+        .signature(SuperBlobBuilder::adHoc(codeDirectoryNamed(identifier)).build())
+        .build();
+}
+
 class CodeSigningTest : public ::testing::Test {
   protected:
     static constexpr std::uint32_t kValidityFlags = 6;

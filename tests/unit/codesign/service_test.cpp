@@ -18,16 +18,6 @@ using codesign::kSuccess;
 using codesign::kUnimplemented;
 using codesign::kUnsigned;
 
-Data codeDirectoryNamed(const std::string& identifier) {
-    return CodeDirectoryBuilder().identifier(identifier).build();
-}
-
-Data imageNamed(const std::string& identifier) {
-    return ExecutableImageBuilder()
-        .signature(SuperBlobBuilder::adHoc(codeDirectoryNamed(identifier)).build())
-        .build();
-}
-
 class StaticCodeOfAPath : public CodeSigningTest {};
 
 TEST_F(StaticCodeOfAPath, IsAThinImageWithItsSignature) {

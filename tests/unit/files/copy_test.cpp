@@ -13,7 +13,6 @@ namespace {
 using files::URL;
 using testing::ElementsAre;
 
-constexpr const char* kAccessControlList = "system.posix_acl_access";
 constexpr const char* kDefaultAccessControlList = "system.posix_acl_default";
 
 class Copy : public FilesTest {

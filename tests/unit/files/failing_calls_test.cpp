@@ -24,8 +24,6 @@ using testing::ElementsAre;
 using testing::IsSubsetOf;
 using testing::StartsWith;
 
-constexpr const char* kAccessControlList = "system.posix_acl_access";
-
 class FailingCalls : public FilesTest {
   protected:
     // How an attempt went: nothing when it succeeded, otherwise its errno.

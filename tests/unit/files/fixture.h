@@ -16,6 +16,9 @@
 
 namespace pinwell::test {
 
+/// The extended attribute that an access control list is kept in.
+inline constexpr const char* kAccessControlList = "system.posix_acl_access";
+
 /// Rights of an ordinary user for as long as it lives, with `directories` given to that user. Nothing is
 /// changed in a test run that is an ordinary user's anyway.
 class AsOrdinaryUser {

@@ -10,8 +10,6 @@ using files::URL;
 using testing::ElementsAre;
 using testing::MatchesRegex;
 
-constexpr const char* kAccessControlList = "system.posix_acl_access";
-
 using ReplacementDirectory = FilesTest;
 
 TEST_F(ReplacementDirectory, IsAFreshPrivateOneBesideTheFile) {

@@ -6,9 +6,12 @@
 #include <cmath>
 #include <limits>
 
+#include "support/text.h"
+
 namespace pinwell::foundation {
 namespace {
 
+using test::repeated;
 using testing::HasSubstr;
 
 Value parsed(std::string_view text) {
@@ -17,7 +20,7 @@ Value parsed(std::string_view text) {
     return result ? *result : Value();
 }
 
-std::string refusal(std::string_view text) {
+std::string jsonRefusal(std::string_view text) {
     const auto result = parseJSON(asBytes(text));
     if (result) return "it was read";
     EXPECT_EQ(result.error().domain(), kDataErrorDomain);
@@ -27,12 +30,6 @@ std::string refusal(std::string_view text) {
 std::string written(const Value& value) {
     const auto result = serializeJSON(value);
     return result ? toString(*result) : "error: " + result.error().localizedDescription();
-}
-
-std::string repeated(std::string_view text, std::size_t count) {
-    std::string out;
-    for (std::size_t i = 0; i < count; ++i) out += text;
-    return out;
 }
 
 TEST(JSON, ReadsEveryKind) {
@@ -53,7 +50,7 @@ TEST(JSON, ReadsLongerIntegersAsFractions) {
 }
 
 TEST(JSON, RefusesANumberThatNoDoubleHolds) {
-    EXPECT_THAT(refusal("[1e999]"), HasSubstr("malformed"));
+    EXPECT_THAT(jsonRefusal("[1e999]"), HasSubstr("malformed"));
 }
 
 TEST(JSON, LetsTheLastOfEqualKeysWin) {
@@ -68,21 +65,21 @@ TEST(JSON, ReadsEscapesInText) {
 
 TEST(JSON, SkipsOneByteOrderMark) {
     EXPECT_EQ(parsed("\xEF\xBB\xBF[]"), Value(Array{}));
-    EXPECT_THAT(refusal("\xEF\xBB\xBF\xEF\xBB\xBF[]"), HasSubstr("malformed at byte 3"));
+    EXPECT_THAT(jsonRefusal("\xEF\xBB\xBF\xEF\xBB\xBF[]"), HasSubstr("malformed at byte 3"));
 }
 
 TEST(JSON, AllowsWhiteSpaceAroundTheDocumentAndNothingElse) {
     EXPECT_EQ(parsed(" \t\r\n[] \n"), Value(Array{}));
-    EXPECT_THAT(refusal("[] x"), HasSubstr("malformed at byte 3"));
-    EXPECT_THAT(refusal("[][]"), HasSubstr("malformed at byte 2"));
-    EXPECT_THAT(refusal(std::string_view("[]\0", 3)), HasSubstr("malformed at byte 2"));
-    EXPECT_THAT(refusal(std::string_view("[]\0garbage", 10)), HasSubstr("malformed at byte 2"));
+    EXPECT_THAT(jsonRefusal("[] x"), HasSubstr("malformed at byte 3"));
+    EXPECT_THAT(jsonRefusal("[][]"), HasSubstr("malformed at byte 2"));
+    EXPECT_THAT(jsonRefusal(std::string_view("[]\0", 3)), HasSubstr("malformed at byte 2"));
+    EXPECT_THAT(jsonRefusal(std::string_view("[]\0garbage", 10)), HasSubstr("malformed at byte 2"));
 }
 
 TEST(JSON, NamesThePositionOfAFault) {
-    EXPECT_THAT(refusal(R"({"a": x})"), HasSubstr("malformed at byte 6"));
-    EXPECT_THAT(refusal("[1, 2"), HasSubstr("malformed at byte 5"));
-    EXPECT_THAT(refusal(""), HasSubstr("malformed at byte 0"));
+    EXPECT_THAT(jsonRefusal(R"({"a": x})"), HasSubstr("malformed at byte 6"));
+    EXPECT_THAT(jsonRefusal("[1, 2"), HasSubstr("malformed at byte 5"));
+    EXPECT_THAT(jsonRefusal(""), HasSubstr("malformed at byte 0"));
 }
 
 TEST(JSON, RefusesWhatTheStandardDoes) {
@@ -110,32 +107,33 @@ TEST(JSON, RefusesWhatTheStandardDoes) {
                                         "]",
                                         "[}",
                                         "[\"a"})
-        EXPECT_THAT(refusal(text), HasSubstr("malformed at byte")) << text;
+        EXPECT_THAT(jsonRefusal(text), HasSubstr("malformed at byte")) << text;
 }
 
 TEST(JSON, RefusesATopLevelThatIsNoContainer) {
     for (const std::string_view text : {"1", "\"text\"", "null", "true"})
-        EXPECT_THAT(refusal(text), HasSubstr("neither an object nor an array")) << text;
+        EXPECT_THAT(jsonRefusal(text), HasSubstr("neither an object nor an array")) << text;
 }
 
 TEST(JSON, ReadsUpToTheLimitOfNestingAndNoDeeper) {
     EXPECT_TRUE(parseJSON(asBytes(repeated("[", 512) + repeated("]", 512))));
-    EXPECT_THAT(refusal(repeated("[", 513) + repeated("]", 513)), HasSubstr("nested deeper than 512"));
-    EXPECT_THAT(refusal(repeated("{\"a\":", 513) + "1" + repeated("}", 513)),
+    EXPECT_THAT(jsonRefusal(repeated("[", 513) + repeated("]", 513)), HasSubstr("nested deeper than 512"));
+    EXPECT_THAT(jsonRefusal(repeated("{\"a\":", 513) + "1" + repeated("}", 513)),
                 HasSubstr("nested deeper than 512"));
 }
 
 TEST(JSON, RefusesMillionsOfLevelsWithoutExhaustingTheStack) {
-    EXPECT_THAT(refusal(repeated("[", 5'000'000)), HasSubstr("nested deeper than 512"));
+    EXPECT_THAT(jsonRefusal(repeated("[", 5'000'000)), HasSubstr("nested deeper than 512"));
 }
 
 TEST(JSON, RefusesMoreValuesThanItsLimit) {
-    EXPECT_THAT(refusal("[" + repeated("1,", kMaximumJSONValues) + "1]"),
+    EXPECT_THAT(jsonRefusal("[" + repeated("1,", kMaximumJSONValues) + "1]"),
                 HasSubstr("more than 1000000 values"));
 }
 
 TEST(JSON, RefusesALongerDocumentThanItsLimit) {
-    EXPECT_THAT(refusal("[]" + std::string(kMaximumJSONSize, ' ')), HasSubstr("longer than 67108864 bytes"));
+    EXPECT_THAT(jsonRefusal("[]" + std::string(kMaximumJSONSize, ' ')),
+                HasSubstr("longer than 67108864 bytes"));
 }
 
 TEST(JSON, WritesCompactlyWithSortedKeys) {

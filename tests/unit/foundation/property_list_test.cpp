@@ -7,10 +7,12 @@
 #include <limits>
 
 #include "foundation/byte_writer.h"
+#include "support/text.h"
 
 namespace pinwell::foundation {
 namespace {
 
+using test::repeated;
 using testing::HasSubstr;
 
 Value parsed(ByteView document) {
@@ -38,12 +40,6 @@ std::string xml(std::string_view body) {
 
 Value parsedXML(std::string_view body) {
     return parsed(asBytes(xml(body)));
-}
-
-std::string repeated(std::string_view text, std::size_t count) {
-    std::string out;
-    for (std::size_t i = 0; i < count; ++i) out += text;
-    return out;
 }
 
 // Lays out a binary list object by object; every number of the trailer can be told to lie.

@@ -5,6 +5,7 @@
 #include <set>
 
 #include "certificates.h"
+#include "fixed_now.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -13,7 +14,6 @@ using test::carries;
 using test::certificateFromPem;
 using test::keyFromPem;
 
-constexpr foundation::Date kNow{1'795'000'000};
 constexpr std::int64_t kDay = 86'400;
 
 class AuthorityTest : public testing::Test {

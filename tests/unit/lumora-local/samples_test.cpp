@@ -4,6 +4,7 @@
 
 #include <filesystem>
 
+#include "fixed_now.h"
 #include "foundation/byte_reader.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/sample_disk_image.h"
@@ -21,8 +22,6 @@ using pinwell::test::readFile;
 using pinwell::test::TemporaryDirectory;
 using pinwell::test::writeFile;
 using testing::ElementsAre;
-
-constexpr foundation::Date kNow{1'795'000'000};
 
 TEST(Samples, AreOneOfEveryKindInADirectoryThatIsMade) {
     const TemporaryDirectory directory;

@@ -8,6 +8,7 @@
 #include <set>
 #include <string>
 
+#include "fixed_now.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/samples.h"
@@ -20,8 +21,6 @@ namespace {
 using pinwell::test::TemporaryDirectory;
 using pinwell::test::Trouble;
 using testing::IsSupersetOf;
-
-constexpr foundation::Date kNow{1'795'000'000};
 
 std::set<std::string> namesIn(const std::string& directory) {
     std::set<std::string> names;

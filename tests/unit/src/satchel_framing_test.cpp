@@ -15,7 +15,7 @@ using test::derElementOfSize;
 using test::SatchelBuilder;
 
 // One element for a certificate, five bytes of payload.
-SatchelBuilder satchel() {
+SatchelBuilder framedSatchel() {
     return SatchelBuilder().certificate(derElementOfSize(30)).payload(toData("hello"));
 }
 
@@ -29,7 +29,7 @@ bool decodes(const Data& container) {
 }
 
 TEST(SatchelFraming, LocatesEveryPart) {
-    const Data container = satchel().build();
+    const Data container = framedSatchel().build();
     constexpr std::size_t kBlock = 32;
     ASSERT_EQ(container.size(), 16 + kBlock + 5 + 72);
     satchel_view view;
@@ -63,20 +63,20 @@ TEST(SatchelFraming, RefusesAMagicThatDiffersInAnyByte) {
     for (std::size_t i = 0; i < kSatchelMagic.size(); ++i) {
         std::string magic(kSatchelMagic);
         magic[i] ^= 1;
-        EXPECT_FALSE(decodes(satchel().magic(magic).build())) << magic;
+        EXPECT_FALSE(decodes(framedSatchel().magic(magic).build())) << magic;
     }
 }
 
 TEST(SatchelFraming, AcceptsVersion1Alone) {
-    EXPECT_TRUE(decodes(satchel().version(1).build()));
-    EXPECT_FALSE(decodes(satchel().version(0).build()));
-    EXPECT_FALSE(decodes(satchel().version(2).build()));
-    EXPECT_FALSE(decodes(satchel().version(0x0100).build()));
-    EXPECT_FALSE(decodes(satchel().version(0x0101).build()));
+    EXPECT_TRUE(decodes(framedSatchel().version(1).build()));
+    EXPECT_FALSE(decodes(framedSatchel().version(0).build()));
+    EXPECT_FALSE(decodes(framedSatchel().version(2).build()));
+    EXPECT_FALSE(decodes(framedSatchel().version(0x0100).build()));
+    EXPECT_FALSE(decodes(framedSatchel().version(0x0101).build()));
 }
 
 TEST(SatchelFraming, DoesNotReadTheReservedField) {
-    EXPECT_TRUE(decodes(satchel().reserved(0xFFFF).build()));
+    EXPECT_TRUE(decodes(framedSatchel().reserved(0xFFFF).build()));
 }
 
 TEST(SatchelFraming, DecodesWithoutACertificateBlock) {
@@ -88,17 +88,17 @@ TEST(SatchelFraming, DecodesWithoutACertificateBlock) {
 }
 
 TEST(SatchelFraming, RefusesAnEmptyPayload) {
-    EXPECT_FALSE(decodes(satchel().payload({}).build()));
+    EXPECT_FALSE(decodes(framedSatchel().payload({}).build()));
 }
 
 TEST(SatchelFraming, RefusesOneByteMore) {
-    Data container = satchel().build();
+    Data container = framedSatchel().build();
     container.push_back(std::byte{0});
     EXPECT_FALSE(decodes(container));
 }
 
 TEST(SatchelFraming, RefusesEveryPrefix) {
-    const Data container = satchel().build();
+    const Data container = framedSatchel().build();
     for (std::size_t size = 0; size < container.size(); ++size) {
         // A buffer of its own, so that a read behind its end is seen.
         const Data prefix(container.begin(), container.begin() + static_cast<std::ptrdiff_t>(size));
@@ -108,21 +108,24 @@ TEST(SatchelFraming, RefusesEveryPrefix) {
 }
 
 TEST(SatchelFraming, RefusesLengthsThatDoNotAddUp) {
-    EXPECT_FALSE(decodes(satchel().certificateBlockLength(31).build()));
-    EXPECT_FALSE(decodes(satchel().certificateBlockLength(33).build()));
-    EXPECT_FALSE(decodes(satchel().payloadLength(4).build()));
-    EXPECT_FALSE(decodes(satchel().payloadLength(6).build()));
-    EXPECT_FALSE(decodes(satchel().certificateBlockLength(0xFFFFFFFF).payloadLength(0xFFFFFFFF).build()));
+    EXPECT_FALSE(decodes(framedSatchel().certificateBlockLength(31).build()));
+    EXPECT_FALSE(decodes(framedSatchel().certificateBlockLength(33).build()));
+    EXPECT_FALSE(decodes(framedSatchel().payloadLength(4).build()));
+    EXPECT_FALSE(decodes(framedSatchel().payloadLength(6).build()));
+    EXPECT_FALSE(
+        decodes(framedSatchel().certificateBlockLength(0xFFFFFFFF).payloadLength(0xFFFFFFFF).build()));
 }
 
 TEST(SatchelFraming, RefusesLengthsThatAddUpIn32BitsAlone) {
     constexpr std::uint32_t kTooMuch = 0xFFFFFFF0;
-    EXPECT_FALSE(decodes(satchel().certificateBlockLength(kTooMuch).payloadLength(37 - kTooMuch).build()));
-    EXPECT_FALSE(decodes(satchel().certificateBlockLength(37 - kTooMuch).payloadLength(kTooMuch).build()));
+    EXPECT_FALSE(
+        decodes(framedSatchel().certificateBlockLength(kTooMuch).payloadLength(37 - kTooMuch).build()));
+    EXPECT_FALSE(
+        decodes(framedSatchel().certificateBlockLength(37 - kTooMuch).payloadLength(kTooMuch).build()));
 }
 
 TEST(SatchelFraming, RefusesALengthThatWrapsTheAddressSpace) {
-    const Data container = satchel().build();
+    const Data container = framedSatchel().build();
     satchel_view view;
     view.version = 99;
     EXPECT_EQ(satchel_decode_header(container.data(), std::numeric_limits<std::uint64_t>::max(), &view), -1);
@@ -137,7 +140,7 @@ TEST(SatchelFraming, RefusesAMissingContainer) {
 }
 
 TEST(SatchelFraming, RefusesAMissingView) {
-    const Data container = satchel().build();
+    const Data container = framedSatchel().build();
     EXPECT_EQ(satchel_decode_header(container.data(), container.size(), nullptr), -1);
 }
 
