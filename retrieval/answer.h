@@ -17,7 +17,7 @@ using foundation::Error;
 struct Answer {
     enum class Kind : std::uint8_t {
         answered,     // there is a response, whatever it says
-        unreachable,  // there is an error, which another try may cure
+        unreachable,  // another try may cure it; there is an error, or a response without a body
         untrusted,    // there is an error: the server was refused
     };
     Kind kind = Kind::unreachable;
@@ -42,6 +42,9 @@ struct Answer {
 
     /// What the server's judgement had to say, for the user.
     std::vector<std::string> messages;
+
+    /// It was answered, and the answer says that there is no ticket.
+    bool hasNoTicket() const;
 };
 
 }  // namespace pinwell::retrieval

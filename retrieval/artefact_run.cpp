@@ -2,7 +2,6 @@
 
 #include <utility>
 
-#include "foundation/json.h"
 #include "foundation/process.h"
 #include "src/DownloadDelegate.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
@@ -89,19 +88,6 @@ Kind kindOf(const PWHashedFile& file) {
     return Kind::none;
 }
 
-// Whether the record says in due form that there is no ticket.
-bool hasNoTicket(const foundation::Data& body) {
-    const auto document = foundation::parseJSON(body);
-    try {
-        const TicketRecord record = ticketRecordOf(document ? *document : foundation::Value());
-        return record.ticketText() == nullptr && record.assetURLTemplate() == nullptr;
-    } catch (const foundation::ValueTypeError&) {
-        return false;
-    } catch (const std::out_of_range&) {
-        return false;
-    }
-}
-
 Cause causeOf(int status, const Answer& answer, const PWHashedFile& file) {
     switch (status) {
         case kExitOK:
@@ -115,8 +101,7 @@ Cause causeOf(int status, const Answer& answer, const PWHashedFile& file) {
         case kExitNoInput:
             return Cause::notReadable;
         default:
-            return answer.kind == Answer::Kind::answered && hasNoTicket(answer.body) ? Cause::notIssued
-                                                                                     : Cause::notAcceptable;
+            return answer.hasNoTicket() ? Cause::notIssued : Cause::notAcceptable;
     }
 }
 

@@ -127,6 +127,10 @@ std::optional<Answer> failureOf(const Exchange& exchange) {
         answer.error = busyError(*exchange.response);
         return answer;
     }
+    if (exchange.body.empty()) {
+        answer.response = exchange.response;
+        return answer;
+    }
     return std::nullopt;
 }
 

@@ -1,0 +1,144 @@
+#include "batch/junit.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+#include <utility>
+
+#include "foundation/format.h"
+
+namespace pinwell::batch {
+namespace {
+
+using foundation::Error;
+using foundation::Result;
+using retrieval::Cause;
+
+constexpr std::size_t kPieceSize = std::size_t{64} * 1024;
+// Room for the counts, which are known at the end: blanks between attributes have no meaning.
+constexpr std::size_t kCountsWidth = 160;
+
+std::string secondsText(double seconds) {
+    const auto milliseconds = static_cast<std::uint64_t>(seconds * 1000 + 0.5);
+    std::string fraction = std::to_string(milliseconds % 1000);
+    return std::to_string(milliseconds / 1000) + "." + std::string(3 - fraction.size(), '0') + fraction;
+}
+
+// What says something of the artefact fails; what kept it from being looked at is an error.
+bool isError(Cause cause) {
+    return cause == Cause::unreachable || cause == Cause::untrusted || cause == Cause::timedOut ||
+           cause == Cause::interrupted;
+}
+
+std::string prologue(std::string_view counts) {
+    std::string text = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<testsuites>\n<testsuite ";
+    text += counts;
+    text += std::string(kCountsWidth - std::min(counts.size(), kCountsWidth), ' ');
+    return text + ">\n";
+}
+
+}  // namespace
+
+std::string escapedForXml(const std::string& text) {
+    std::string escaped;
+    for (const char c : foundation::escapeForTerminal(text)) {
+        switch (c) {
+            case '&':
+                escaped += "&amp;";
+                break;
+            case '<':
+                escaped += "&lt;";
+                break;
+            case '>':
+                escaped += "&gt;";
+                break;
+            case '"':
+                escaped += "&quot;";
+                break;
+            default:
+                escaped += c;
+        }
+    }
+    return escaped;
+}
+
+Result<JUnitReport> JUnitReport::begin(const std::string& path) {
+    std::string temporary = path + ".XXXXXX";
+    foundation::FileDescriptor file(::mkostemp(temporary.data(), O_CLOEXEC));
+    if (!file) return Error::posix(errno, path);
+    const mode_t mask = ::umask(0);
+    ::umask(mask);
+    static_cast<void>(::fchmod(file.get(), 0666 & ~mask));
+    JUnitReport report(path, std::move(temporary), std::move(file));
+    report.write(prologue(""));
+    return report;
+}
+
+JUnitReport::JUnitReport(JUnitReport&& other) noexcept
+    : path_(std::move(other.path_)),
+      temporary_(std::exchange(other.temporary_, {})),
+      file_(std::move(other.file_)),
+      pending_(std::move(other.pending_)),
+      failure_(other.failure_) {}
+
+JUnitReport::~JUnitReport() {
+    if (!temporary_.empty()) ::unlink(temporary_.c_str());
+}
+
+void JUnitReport::add(const Report& report) {
+    std::string text = "<testcase classname=\"pinwell." + std::string(nameOfOperation(report.operation)) +
+                       "\" name=\"" + escapedForXml(report.path) + "\" time=\"" +
+                       secondsText(report.seconds) + "\"";
+    if (report.cause == Cause::worked) {
+        write(text + "/>\n");
+        return;
+    }
+    const char* const element = isError(report.cause) ? "error" : "failure";
+    text += std::string(">\n<") + element + " type=\"" + std::string(nameOf(report.cause)) + "\" message=\"" +
+            std::string(nameOf(report.cause)) + ": exit status " + std::to_string(report.exitStatus) + "\">";
+    for (const std::string& message : report.messages) text += escapedForXml(message) + "\n";
+    write(text + "</" + element + ">\n</testcase>\n");
+}
+
+Result<void> JUnitReport::finish(const Summary& summary) {
+    std::uint64_t errors = 0;
+    for (const Cause cause : retrieval::allCauses())
+        if (isError(cause)) errors += summary.numberOf(cause);
+    const std::uint64_t failures = summary.total - summary.numberOf(Cause::worked) - errors;
+    write("</testsuite>\n</testsuites>\n");
+    flush();
+    const std::string head =
+        prologue(foundation::format("name=\"pinwell-batch %@\" tests=\"%llu\" failures=\"%llu\" "
+                                    "errors=\"%llu\" skipped=\"0\" time=\"%@\"",
+                                    std::string(nameOfOperation(summary.operation)), summary.total, failures,
+                                    errors, secondsText(summary.seconds)));
+    if (failure_ == 0 &&
+        ::pwrite(file_.get(), head.data(), head.size(), 0) != static_cast<ssize_t>(head.size()))
+        failure_ = errno;
+    if (failure_ == 0 && ::fsync(file_.get()) != 0 && errno != EINVAL) failure_ = errno;
+    if (failure_ == 0 && std::rename(temporary_.c_str(), path_.c_str()) != 0) failure_ = errno;
+    if (failure_ != 0) return Error::posix(failure_, path_);
+    temporary_.clear();
+    return {};
+}
+
+void JUnitReport::write(const std::string& text) {
+    pending_ += text;
+    if (pending_.size() >= kPieceSize) flush();
+}
+
+void JUnitReport::flush() {
+    for (std::string_view rest = pending_; !rest.empty() && failure_ == 0;) {
+        const ssize_t count = ::write(file_.get(), rest.data(), rest.size());
+        if (count < 0 && errno == EINTR) continue;
+        if (count < 0) failure_ = errno;
+        if (count > 0) rest.remove_prefix(static_cast<std::size_t>(count));
+    }
+    pending_.clear();
+}
+
+}  // namespace pinwell::batch

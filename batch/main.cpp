@@ -1,0 +1,228 @@
+// pinwell-batch: many artefacts in one process.
+#include <malloc.h>
+#include <sys/signalfd.h>
+#include <sys/stat.h>
+#include <sysexits.h>
+#include <unistd.h>
+
+#include <array>
+#include <csignal>
+#include <cstdlib>
+#include <exception>
+#include <optional>
+
+#include "batch/command_line.h"
+#include "batch/coordinator.h"
+#include "batch/journal.h"
+#include "batch/junit.h"
+#include "batch/progress.h"
+#include "batch/selection.h"
+#include "companion/command_line.h"
+#include "companion/own_temporary_directory.h"
+#include "foundation/process.h"
+#include "src/host_platform.h"
+#include "src/messages.h"
+
+namespace {
+
+using namespace pinwell;
+using namespace pinwell::batch;
+
+constexpr int kMostArenas = 2;
+constexpr int kSignalBase = 128;
+
+void complain(const std::string& text) {
+    companion::complain(kProgramName, text);
+}
+
+// The signals that end a run, blocked in all threads and readable here. One that is ignored from the start,
+// by nohup(1) for instance, stays ignored.
+foundation::FileDescriptor takeSignals() {
+    sigset_t ending;
+    sigemptyset(&ending);
+    for (const int number : {SIGHUP, SIGINT, SIGTERM}) {
+        struct sigaction now {};
+        sigaction(number, nullptr, &now);
+        if (now.sa_handler != SIG_IGN) sigaddset(&ending, number);
+    }
+    sigprocmask(SIG_BLOCK, &ending, nullptr);
+    return foundation::FileDescriptor(::signalfd(-1, &ending, SFD_CLOEXEC | SFD_NONBLOCK));
+}
+
+// The file that carries the ticket.
+std::optional<FileState> stateOfCarrier(const std::string& path, retrieval::Kind kind) {
+    const std::string carrier = kind == retrieval::Kind::bundle ? path + "/Contents/CodeResources" : path;
+    struct stat status {};
+    if (::lstat(carrier.c_str(), &status) != 0) return std::nullopt;
+    return FileState{static_cast<std::uint64_t>(status.st_size), status.st_mtim.tv_sec,
+                     status.st_mtim.tv_nsec};
+}
+
+class Run {
+  public:
+    Run(const Settings& settings, std::optional<Journal> journal, std::optional<JUnitReport> junit)
+        : settings_(settings),
+          journal_(std::move(journal)),
+          junit_(std::move(junit)),
+          selection_(settings.shard, settings.shards),
+          inColor_(companion::wantsColor(settings.color, STDOUT_FILENO)),
+          progress_(!settings.isQuiet && ::isatty(STDERR_FILENO) == 1) {
+        summary_.operation = settings.operation;
+    }
+
+    int work(const Platform& platform, PathList& paths, int signals) {
+        const auto begun = retrieval::Clock::now();
+        Coordinator coordinator(settings_, platform, paths, signals, events());
+        const std::optional<int> signal = coordinator.run();
+        summary_.seconds = std::chrono::duration<double>(retrieval::Clock::now() - begun).count();
+        progress_.clear();
+        if (const auto& error = coordinator.listError()) {
+            complain("the list cannot be read any further: " + error->localizedDescription());
+            summary_.exitStatus = retrieval::worseStatus(summary_.exitStatus, EX_NOINPUT);
+        } else if (!coordinator.hasSeenPaths() && !signal) {
+            complain("the list holds no path");
+            return EX_USAGE;
+        }
+        if (signal) summary_.exitStatus = kSignalBase + *signal;
+        return finish();
+    }
+
+    bool wentWell() const { return summary_.exitStatus == EX_OK; }
+
+  private:
+    Coordinator::Events events() {
+        return {.isWanted = [this](const std::string& path) { return isWanted(path); },
+                .ended = [this](const Report& report) { take(report); },
+                .isDoneBefore = [this](const std::string& path,
+                                       const retrieval::ArtefactRun& run) { return isDoneBefore(path, run); },
+                .wasDoneBefore = [this] { ++summary_.resumed; },
+                .turned =
+                    [this](std::size_t inWork) {
+                        progress_.show(summary_.total,
+                                       summary_.total - summary_.numberOf(retrieval::Cause::worked), inWork);
+                    }};
+    }
+
+    bool isWanted(const std::string& path) {
+        const auto choice = selection_.choose(path);
+        if (choice == Selection::Choice::namedBefore) ++summary_.duplicates;
+        return choice == Selection::Choice::wanted;
+    }
+
+    // By path, and by what the file is: rebuilt with the same length and time, it still has another hash.
+    bool isDoneBefore(const std::string& path, const retrieval::ArtefactRun& run) const {
+        if (!journal_) return false;
+        const JournalEntry* const entry = journal_->find(canonicalPath(path), settings_.operation);
+        return entry != nullptr && entry->recordName == run.recordName() &&
+               stateOfCarrier(path, run.kind()) == entry->state;
+    }
+
+    void take(const Report& report) {
+        summary_.count(report);
+        if (journal_ && report.attempts > 0) {
+            const auto state = stateOfCarrier(report.path, report.kind);
+            keep(journal_->add(canonicalPath(report.path), {report.exitStatus, report.cause, report.operation,
+                                                            state, report.recordName}));
+        }
+        if (junit_) junit_->add(report);
+        if (settings_.asJson) return print(asJson(report));
+        if (!settings_.isQuiet) print(asText(report, settings_.isVerbose, inColor_));
+    }
+
+    void print(const std::string& line) {
+        progress_.clear();
+        output_.write(line + "\n");
+    }
+
+    // The first failure to write a file of ours is said once; the artefacts are what matters.
+    void keep(const foundation::Result<void>& result) {
+        if (result || hasComplained_) return;
+        hasComplained_ = true;
+        progress_.clear();
+        complain(result.error().localizedDescription());
+    }
+
+    int finish() {
+        if (journal_) keep(journal_->synchronize());
+        if (junit_) keep(junit_->finish(summary_));
+        if (settings_.asJson)
+            print(asJson(summary_));
+        else if (!settings_.isQuiet)
+            print(asText(summary_));
+        if (output_.hasFailed()) complain("cannot write to standard output");
+        const bool hasLostSomething = hasComplained_ || output_.hasFailed();
+        return hasLostSomething && wentWell() ? EX_IOERR : summary_.exitStatus;
+    }
+
+    const Settings& settings_;
+    std::optional<Journal> journal_;
+    std::optional<JUnitReport> junit_;
+    Selection selection_;
+    companion::Output output_{STDOUT_FILENO};
+    const bool inColor_;
+    Progress progress_;
+    Summary summary_;
+    bool hasComplained_ = false;
+};
+
+int runBatch(const Settings& settings, int signals) {
+    // Lines are collected an artefact: a thread without one of them has nothing to print.
+    verboseLevel = settings.isVerbose ? kVerbosityVerbose : kVerbosityQuiet;
+
+    auto paths = PathList::open(settings.paths, settings.from, settings.isZeroTerminated);
+    if (!paths) {
+        complain("the list cannot be read: " + paths.error().localizedDescription());
+        return EX_NOINPUT;
+    }
+    std::optional<Journal> journal;
+    if (settings.journal) {
+        auto opened = Journal::open(*settings.journal);
+        if (!opened) {
+            complain("the journal cannot be used: " + opened.error().localizedDescription());
+            return EX_CANTCREAT;
+        }
+        journal = *std::move(opened);
+    }
+    std::optional<JUnitReport> junit;
+    if (settings.junit) {
+        auto begun = JUnitReport::begin(*settings.junit);
+        if (!begun) {
+            complain("the report cannot be written: " + begun.error().localizedDescription());
+            return EX_CANTCREAT;
+        }
+        junit.emplace(*std::move(begun));
+    }
+    auto temporary = companion::OwnTemporaryDirectory::make(kProgramName);
+    if (!temporary) {
+        complain("no temporary directory can be made: " + temporary.error().localizedDescription());
+        return EX_CANTCREAT;
+    }
+    const HostPlatform host([](int) {});
+    Run run(settings, std::move(journal), std::move(junit));
+    const int status = run.work(host.services(), *paths, signals);
+    if (status == EX_OK && !settings.keepsTemporaryFiles)
+        temporary->remove();
+    else if (temporary->holdsFiles() && !settings.isQuiet)
+        complain("tickets and copies are kept in " + temporary->path());
+    return status;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    // A heap for each thread would be memory that grows with --jobs.
+    mallopt(M_ARENA_MAX, kMostArenas);
+    foundation::occupyStandardStreams();
+    // A reader that has gone away, and a file that would grow beyond the caller's limit, are failed writes.
+    std::signal(SIGPIPE, SIG_IGN);
+    std::signal(SIGXFSZ, SIG_IGN);
+    try {
+        Settings settings;
+        if (const auto status = readCommandLine(argc, argv, settings)) return *status;
+        const foundation::FileDescriptor signals = takeSignals();
+        return runBatch(settings, signals.get());
+    } catch (const std::exception& error) {
+        complain(error.what());
+        return EX_SOFTWARE;
+    }
+}

@@ -1,0 +1,60 @@
+// The paths of a batch, read as they are worked on: first those of the command line, then those of a file.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <variant>
+#include <vector>
+
+#include "foundation/error.h"
+#include "foundation/file_io.h"
+
+namespace pinwell::batch {
+
+/// Longer ones name nothing (PATH_MAX), and are cut to this.
+inline constexpr std::size_t kLongestPath = 4096;
+
+class PathList {
+  public:
+    /// `from` is a file, "-" is standard input. An error names a file that cannot be opened.
+    static foundation::Result<PathList> open(std::vector<std::string> paths,
+                                             const std::optional<std::string>& from, bool isZeroTerminated);
+
+    enum class State : std::uint8_t {
+        path,
+        end,
+        wait,   // standard input has nothing yet: descriptor() tells when it does
+        broken  // it cannot be read any further: error()
+    };
+
+    /// The next path. Empty lines are passed over. Never blocks.
+    State next(std::string& path);
+
+    /// Of `wait`: readable when there is more.
+    int descriptor() const noexcept { return file_.get(); }
+
+    /// Of `broken`.
+    const std::optional<foundation::Error>& error() const noexcept { return error_; }
+
+  private:
+    PathList(std::vector<std::string> paths, foundation::FileDescriptor file, std::string name,
+             char separator);
+    std::optional<std::string> takeLine();
+    State fill();
+
+    std::vector<std::string> paths_;
+    std::size_t nextPath_ = 0;
+
+    foundation::FileDescriptor file_;
+    std::string name_;
+    char separator_;
+    std::vector<char> buffer_;
+    std::size_t begin_ = 0;
+    std::size_t end_ = 0;
+    bool ended_ = false;
+    std::string line_;  // what there is of the next one
+    std::optional<foundation::Error> error_;
+};
+
+}  // namespace pinwell::batch

@@ -1,0 +1,44 @@
+// What a batch was asked to do.
+#pragma once
+
+#include <chrono>
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "companion/output.h"
+#include "retrieval/retry_policy.h"
+
+namespace pinwell::batch {
+
+using Seconds = std::chrono::duration<double>;
+
+struct Settings {
+    std::uint8_t operation = 0;  // kOperationStaple or kOperationValidate
+
+    // The list.
+    std::vector<std::string> paths;
+    std::optional<std::string> from;  // a file with one path a line; "-": standard input
+    bool isZeroTerminated = false;    // a zero byte ends each path of it, not a newline
+    std::uint64_t shard = 1;          // of `shards` parts of the list, counted from 1
+    std::uint64_t shards = 1;
+
+    // How.
+    std::uint64_t jobs = 1;
+    retrieval::RetryPolicy retry;
+    Seconds wait{0};
+    std::optional<Seconds> timeout;   // of one artefact
+    std::optional<Seconds> deadline;  // of all
+    std::optional<std::string> journal;
+    bool keepsTemporaryFiles = false;
+
+    // What is said.
+    bool asJson = false;
+    bool isQuiet = false;
+    bool isVerbose = false;
+    companion::ColorWhen color = companion::ColorWhen::automatic;
+    std::optional<std::string> junit;
+};
+
+}  // namespace pinwell::batch

@@ -1,0 +1,49 @@
+#include "batch/workers.h"
+
+#include <system_error>
+#include <utility>
+
+namespace pinwell::batch {
+
+Workers::~Workers() {
+    {
+        const std::lock_guard lock(mutex_);
+        stopping_ = true;
+        urgent_.clear();
+        tasks_.clear();
+    }
+    changed_.notify_all();
+    for (std::thread& thread : threads_) thread.join();
+}
+
+void Workers::add(std::function<void()> task, bool isUrgent) {
+    const std::lock_guard lock(mutex_);
+    (isUrgent ? urgent_ : tasks_).push_back(std::move(task));
+    if (idle_ < urgent_.size() + tasks_.size() && threads_.size() < maximum_) {
+        try {
+            threads_.emplace_back([this] { work(); });
+        } catch (const std::system_error&) {
+            if (threads_.empty()) throw;  // with fewer it takes longer
+        }
+    }
+    changed_.notify_one();
+}
+
+void Workers::work() {
+    std::unique_lock lock(mutex_);
+    while (true) {
+        ++idle_;
+        changed_.wait(lock, [this] { return stopping_ || !urgent_.empty() || !tasks_.empty(); });
+        --idle_;
+        if (stopping_) return;
+        auto& queue = urgent_.empty() ? tasks_ : urgent_;
+        std::function<void()> task = std::move(queue.front());
+        queue.pop_front();
+        lock.unlock();
+        task();
+        task = nullptr;  // what it holds goes before the thread waits
+        lock.lock();
+    }
+}
+
+}  // namespace pinwell::batch

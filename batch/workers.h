@@ -1,0 +1,39 @@
+// Threads that take tasks from one queue.
+#pragma once
+
+#include <condition_variable>
+#include <deque>
+#include <functional>
+#include <mutex>
+#include <thread>
+#include <vector>
+
+namespace pinwell::batch {
+
+/// Threads are started as tasks come, up to the maximum. Destruction waits for the tasks that have begun and
+/// drops the others.
+class Workers {
+  public:
+    explicit Workers(std::size_t maximum) : maximum_(maximum) {}
+    ~Workers();
+    Workers(const Workers&) = delete;
+    Workers& operator=(const Workers&) = delete;
+
+    /// Queues a task; an urgent one goes before all that are not. An exception that leaves a task ends the
+    /// process. Throws std::system_error if there is no thread to be had at all.
+    void add(std::function<void()> task, bool isUrgent = false);
+
+  private:
+    void work();
+
+    const std::size_t maximum_;
+    std::mutex mutex_;
+    std::condition_variable changed_;
+    std::deque<std::function<void()>> urgent_;
+    std::deque<std::function<void()>> tasks_;
+    std::size_t idle_ = 0;
+    bool stopping_ = false;
+    std::vector<std::thread> threads_;
+};
+
+}  // namespace pinwell::batch
