@@ -4,6 +4,7 @@
 
 #include <array>
 #include <atomic>
+#include <cerrno>
 #include <csignal>
 #include <cstddef>
 #include <mutex>
@@ -23,9 +24,25 @@ std::array<struct sigaction, kDeferred.size()> before;
 std::mutex mutex;
 std::size_t alive = 0;
 
+// Whether a deferral is alive, for the handler, which may not wait for the mutex.
+std::atomic<bool> deferring = false;
+
+void passOn(std::size_t i) {
+    if (arrived.at(i).exchange(false)) kill(getpid(), kDeferred.at(i));
+}
+
+// The kernel may have chosen this handler for a thread that runs it only after the deferral has ended and has
+// looked for the last time. So the handler sets its flag and then looks whether anybody will read it; the
+// deferral says that it has ended and then reads the flags. Whichever comes second sees what the other has
+// written.
 void note(int number) {
-    for (std::size_t i = 0; i < kDeferred.size(); ++i)
-        if (kDeferred.at(i) == number) arrived.at(i) = true;
+    const int error = errno;
+    for (std::size_t i = 0; i < kDeferred.size(); ++i) {
+        if (kDeferred.at(i) != number) continue;
+        arrived.at(i) = true;
+        if (!deferring) passOn(i);
+    }
+    errno = error;
 }
 
 }  // namespace
@@ -33,6 +50,7 @@ void note(int number) {
 SignalDeferral::SignalDeferral() {
     const std::lock_guard lock(mutex);
     if (alive++ > 0) return;
+    deferring = true;
     struct sigaction noting {};
     noting.sa_handler = note;
     noting.sa_flags = SA_RESTART;  // nothing is to notice
@@ -49,11 +67,11 @@ SignalDeferral::~SignalDeferral() {
         const std::lock_guard lock(mutex);
         if (--alive > 0) return;
         for (std::size_t i = 0; i < kDeferred.size(); ++i) sigaction(kDeferred.at(i), &before.at(i), nullptr);
+        deferring = false;  // after the handlers, so that what the handler passes on does not come back to it
     }
     // Without the lock: what the signal starts may take its time. A deferral that began meanwhile puts the
     // signal off once more.
-    for (std::size_t i = 0; i < kDeferred.size(); ++i)
-        if (arrived.at(i).exchange(false)) kill(getpid(), kDeferred.at(i));
+    for (std::size_t i = 0; i < kDeferred.size(); ++i) passOn(i);
 }
 
 }  // namespace pinwell::foundation

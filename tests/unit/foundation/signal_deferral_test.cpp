@@ -83,6 +83,35 @@ TEST_F(Deferral, MayLiveInManyThreadsAtOnce) {
     EXPECT_GT(taken, 1);
 }
 
+// A thread may run the handler late: the kernel chose it while the deferral lived.
+class DeferralWithALateHandler : public Deferral {
+  protected:
+    static auto handler() {
+        struct sigaction installed {};
+        sigaction(SIGTERM, nullptr, &installed);
+        return installed.sa_handler;
+    }
+};
+
+TEST_F(DeferralWithALateHandler, LosesNoSignalThatIsHandledAfterItsEnd) {
+    std::optional<SignalDeferral> deferral(std::in_place);
+    const auto late = handler();
+    deferral.reset();
+    late(SIGTERM);
+    EXPECT_EQ(taken, 1);
+}
+
+TEST_F(DeferralWithALateHandler, LeavesSuchASignalToTheNextDeferral) {
+    std::optional<SignalDeferral> deferral(std::in_place);
+    const auto late = handler();
+    deferral.reset();
+    deferral.emplace();
+    late(SIGTERM);
+    EXPECT_EQ(taken, 0);
+    deferral.reset();
+    EXPECT_EQ(taken, 1);
+}
+
 TEST_F(Deferral, LeavesAnIgnoredSignalIgnored) {
     std::signal(SIGHUP, SIG_IGN);
     {
