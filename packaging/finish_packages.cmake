@@ -1,4 +1,7 @@
 # Run by cpack when the packages are made: packs each again, and puts its bill of materials beside it.
+if(NOT CPACK_GENERATOR STREQUAL "DEB")
+  return()
+endif()
 foreach(package IN LISTS CPACK_PACKAGE_FILES)
   execute_process(COMMAND ${CMAKE_CURRENT_LIST_DIR}/repack ${package} COMMAND_ERROR_IS_FATAL ANY)
   get_filename_component(file ${package} NAME)

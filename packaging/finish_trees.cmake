@@ -1,4 +1,7 @@
 # Run by cpack when the files of all packages stand in folders of their own, before they are packed.
+if(NOT CPACK_GENERATOR STREQUAL "DEB")
+  return()  # rpm has its own way with dates and manuals
+endif()
 file(GLOB trees LIST_DIRECTORIES true ${CPACK_TEMPORARY_DIRECTORY}/*)
 foreach(tree IN LISTS trees)
   get_filename_component(group ${tree} NAME)
