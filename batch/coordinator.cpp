@@ -1,13 +1,12 @@
 #include "batch/coordinator.h"
 
 #include <poll.h>
-#include <sys/signalfd.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <array>
 #include <utility>
 
+#include "companion/ending_signals.h"
 #include "src/DownloadDelegate.h"
 #include "src/messages.h"
 
@@ -22,7 +21,6 @@ namespace {
 // another one goes beside it.
 constexpr std::chrono::milliseconds kGathering{20};
 constexpr std::chrono::seconds kPatienceWithAGroup{1};
-constexpr int kSignalBase = 128;
 
 Clock::duration clockTime(Seconds seconds) {
     return std::chrono::duration_cast<Clock::duration>(seconds);
@@ -36,8 +34,8 @@ std::optional<Clock::time_point> earlier(std::optional<Clock::time_point> a,
 
 }  // namespace
 
-Coordinator::Coordinator(const Settings& settings, const Platform& platform, PathList& paths, int signals,
-                         Events events)
+Coordinator::Coordinator(const Settings& settings, const Platform& platform, companion::PathList& paths,
+                         const foundation::FileDescriptor& signals, Events events)
     : settings_(settings),
       platform_(platform),
       paths_(paths),
@@ -58,8 +56,9 @@ std::optional<int> Coordinator::run() {
 }
 
 bool Coordinator::isDone() const {
-    return begun_ == 0 && (list_ == PathList::State::end || list_ == PathList::State::broken ||
-                           (isOver_ && list_ == PathList::State::wait));
+    return begun_ == 0 &&
+           (list_ == companion::PathList::State::end || list_ == companion::PathList::State::broken ||
+            (isOver_ && list_ == companion::PathList::State::wait));
 }
 
 void Coordinator::turn() {
@@ -73,9 +72,9 @@ void Coordinator::turn() {
 }
 
 void Coordinator::waitForNews() {
-    std::array<pollfd, 3> sources{pollfd{signals_, POLLIN, 0}, pollfd{news_.descriptor(), POLLIN, 0},
+    std::array<pollfd, 3> sources{pollfd{signals_.get(), POLLIN, 0}, pollfd{news_.descriptor(), POLLIN, 0},
                                   pollfd{-1, POLLIN, 0}};
-    if (list_ == PathList::State::wait && begun_ < kMostBegun && inWork() < kMostInWork)
+    if (list_ == companion::PathList::State::wait && begun_ < kMostBegun && inWork() < kMostInWork)
         sources.at(2).fd = paths_.descriptor();
     static_cast<void>(::poll(sources.data(), sources.size(), millisecondsToWait()));
 }
@@ -97,9 +96,9 @@ int Coordinator::millisecondsToWait() const {
 }
 
 void Coordinator::takeSignal() {
-    signalfd_siginfo info{};
-    if (::read(signals_, &info, sizeof info) != sizeof info) return;
-    if (!signal_) signal_ = static_cast<int>(info.ssi_signo);
+    const auto number = companion::nextEndingSignal(signals_);
+    if (!number) return;
+    if (!signal_) signal_ = number;
     isOver_ = true;
     if (lookups_) lookups_->cancel();
 }
@@ -217,7 +216,7 @@ void Coordinator::endOverdue() {
 }
 
 void Coordinator::endAllUndone(Cause cause) {
-    const int status = signal_ ? kSignalBase + *signal_ : kExitNoHost;
+    const int status = signal_ ? companion::kSignalBase + *signal_ : kExitNoHost;
     const auto endThese = [&](std::deque<ItemRef> items) {
         for (const ItemRef& item : items)
             if (!item->hasEnded) end(item, {status, cause});
@@ -240,7 +239,7 @@ void Coordinator::startLookups() {
     std::erase_if(toLookUp_, [](const ItemRef& item) { return item->hasEnded; });
     while (!toLookUp_.empty() && groups_ < kMostGroups) {
         const bool isFull = toLookUp_.size() >= retrieval::kNamesPerRequest;
-        const bool mayGrow = atWork_ > 0 || list_ == PathList::State::path;
+        const bool mayGrow = atWork_ > 0 || list_ == companion::PathList::State::path;
         const bool isFirst = groups_ == 0 && (!mayGrow || now - *firstToLookUp_ >= kGathering);
         const bool isBesideASlowOne = groups_ > 0 && now - *lastGroupBegan_ >= kPatienceWithAGroup;
         if (!isFull && !isFirst && !isBesideASlowOne) return;
@@ -279,9 +278,9 @@ void Coordinator::startWork() {
 // False if there is no path, now or ever.
 bool Coordinator::beginNext() {
     std::string path;
-    if (list_ == PathList::State::end || list_ == PathList::State::broken) return false;
+    if (list_ == companion::PathList::State::end || list_ == companion::PathList::State::broken) return false;
     list_ = paths_.next(path);
-    if (list_ != PathList::State::path) return false;
+    if (list_ != companion::PathList::State::path) return false;
     hasSeenPaths_ = true;
     if (!events_.isWanted(path)) return true;
     if (isOver_) {
@@ -326,7 +325,7 @@ void Coordinator::end(const ItemRef& item, const Outcome& outcome) {
     waitNoMore(*item);
     Report report;
     report.path = item->path;
-    report.operation = settings_.operation;
+    report.operation = nameOfOperation(settings_.operation);
     report.kind = item->run->kind();
     report.recordName = item->run->recordName();
     report.exitStatus = outcome.exitStatus;
@@ -345,8 +344,8 @@ void Coordinator::end(const ItemRef& item, const Outcome& outcome) {
 void Coordinator::endUnbegun(const std::string& path, Cause cause) {
     Report report;
     report.path = path;
-    report.operation = settings_.operation;
-    report.exitStatus = signal_ ? kSignalBase + *signal_ : kExitNoHost;
+    report.operation = nameOfOperation(settings_.operation);
+    report.exitStatus = signal_ ? companion::kSignalBase + *signal_ : kExitNoHost;
     report.cause = cause;
     events_.ended(report);
 }

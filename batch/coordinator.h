@@ -17,10 +17,10 @@
 
 #include "batch/item.h"
 #include "batch/lookups.h"
-#include "batch/path_list.h"
 #include "batch/settings.h"
 #include "batch/wake_up.h"
 #include "batch/workers.h"
+#include "companion/path_list.h"
 
 namespace pinwell::batch {
 
@@ -45,8 +45,8 @@ class Coordinator {
     };
 
     /// `signals` is readable when a signal has come that ends the run (signalfd(2)).
-    Coordinator(const Settings& settings, const Platform& platform, PathList& paths, int signals,
-                Events events);
+    Coordinator(const Settings& settings, const Platform& platform, companion::PathList& paths,
+                const foundation::FileDescriptor& signals, Events events);
     ~Coordinator();
     Coordinator(const Coordinator&) = delete;
     Coordinator& operator=(const Coordinator&) = delete;
@@ -97,13 +97,13 @@ class Coordinator {
 
     const Settings& settings_;
     const Platform platform_;
-    PathList& paths_;
-    const int signals_;
+    companion::PathList& paths_;
+    const foundation::FileDescriptor& signals_;
     const Events events_;
     const std::optional<Clock::time_point> deadline_;
 
     bool hasSeenPaths_ = false;
-    PathList::State list_ = PathList::State::path;
+    companion::PathList::State list_ = companion::PathList::State::path;
     std::optional<int> signal_;
     bool isOver_ = false;  // nothing more is begun
 

@@ -23,7 +23,7 @@ using retrieval::Cause;
 
 constexpr std::string_view kFirstLine = "pinwell-batch journal 1\n";
 constexpr std::string_view kUnknown = "-";
-constexpr std::size_t kPieceSize = std::size_t{64} * 1024;
+constexpr std::size_t kJournalPieceSize = std::size_t{64} * 1024;
 constexpr std::size_t kLongestLine = std::size_t{32} * 1024;
 constexpr std::size_t kFields = 7;
 
@@ -93,7 +93,7 @@ Result<Journal> Journal::open(const std::string& path) {
 
 Result<void> Journal::read() {
     std::string line;
-    std::string piece(kPieceSize, '\0');
+    std::string piece(kJournalPieceSize, '\0');
     bool isFirst = true;
     bool isTooLong = false;
     while (true) {

@@ -18,7 +18,7 @@ using foundation::Error;
 using foundation::Result;
 using retrieval::Cause;
 
-constexpr std::size_t kPieceSize = std::size_t{64} * 1024;
+constexpr std::size_t kReportPieceSize = std::size_t{64} * 1024;
 // Room for the counts, which are known at the end: blanks between attributes have no meaning.
 constexpr std::size_t kCountsWidth = 160;
 
@@ -90,9 +90,8 @@ JUnitReport::~JUnitReport() {
 }
 
 void JUnitReport::add(const Report& report) {
-    std::string text = "<testcase classname=\"pinwell." + std::string(nameOfOperation(report.operation)) +
-                       "\" name=\"" + escapedForXml(report.path) + "\" time=\"" +
-                       secondsText(report.seconds) + "\"";
+    std::string text = "<testcase classname=\"pinwell." + std::string(report.operation) + "\" name=\"" +
+                       escapedForXml(report.path) + "\" time=\"" + secondsText(report.seconds) + "\"";
     if (report.cause == Cause::worked) {
         write(text + "/>\n");
         return;
@@ -111,11 +110,10 @@ Result<void> JUnitReport::finish(const Summary& summary) {
     const std::uint64_t failures = summary.total - summary.numberOf(Cause::worked) - errors;
     write("</testsuite>\n</testsuites>\n");
     flush();
-    const std::string head =
-        prologue(foundation::format("name=\"pinwell-batch %@\" tests=\"%llu\" failures=\"%llu\" "
-                                    "errors=\"%llu\" skipped=\"0\" time=\"%@\"",
-                                    std::string(nameOfOperation(summary.operation)), summary.total, failures,
-                                    errors, secondsText(summary.seconds)));
+    const std::string head = prologue(foundation::format(
+        "name=\"pinwell-batch %@\" tests=\"%llu\" failures=\"%llu\" "
+        "errors=\"%llu\" skipped=\"0\" time=\"%@\"",
+        std::string(summary.operation), summary.total, failures, errors, secondsText(summary.seconds)));
     if (failure_ == 0 &&
         ::pwrite(file_.get(), head.data(), head.size(), 0) != static_cast<ssize_t>(head.size()))
         failure_ = errno;
@@ -128,7 +126,7 @@ Result<void> JUnitReport::finish(const Summary& summary) {
 
 void JUnitReport::write(const std::string& text) {
     pending_ += text;
-    if (pending_.size() >= kPieceSize) flush();
+    if (pending_.size() >= kReportPieceSize) flush();
 }
 
 void JUnitReport::flush() {

@@ -1,6 +1,5 @@
 // pinwell-batch: many artefacts in one process.
 #include <malloc.h>
-#include <sys/signalfd.h>
 #include <sys/stat.h>
 #include <sysexits.h>
 #include <unistd.h>
@@ -18,6 +17,7 @@
 #include "batch/progress.h"
 #include "batch/selection.h"
 #include "companion/command_line.h"
+#include "companion/ending_signals.h"
 #include "companion/own_temporary_directory.h"
 #include "foundation/process.h"
 #include "src/host_platform.h"
@@ -29,24 +29,9 @@ using namespace pinwell;
 using namespace pinwell::batch;
 
 constexpr int kMostArenas = 2;
-constexpr int kSignalBase = 128;
 
 void complain(const std::string& text) {
     companion::complain(kProgramName, text);
-}
-
-// The signals that end a run, blocked in all threads and readable here. One that is ignored from the start,
-// by nohup(1) for instance, stays ignored.
-foundation::FileDescriptor takeSignals() {
-    sigset_t ending;
-    sigemptyset(&ending);
-    for (const int number : {SIGHUP, SIGINT, SIGTERM}) {
-        struct sigaction now {};
-        sigaction(number, nullptr, &now);
-        if (now.sa_handler != SIG_IGN) sigaddset(&ending, number);
-    }
-    sigprocmask(SIG_BLOCK, &ending, nullptr);
-    return foundation::FileDescriptor(::signalfd(-1, &ending, SFD_CLOEXEC | SFD_NONBLOCK));
 }
 
 // The file that carries the ticket.
@@ -67,10 +52,11 @@ class Run {
           selection_(settings.shard, settings.shards),
           inColor_(companion::wantsColor(settings.color, STDOUT_FILENO)),
           progress_(!settings.isQuiet && ::isatty(STDERR_FILENO) == 1) {
-        summary_.operation = settings.operation;
+        summary_.operation = nameOfOperation(settings.operation);
     }
 
-    int work(const Platform& platform, PathList& paths, int signals) {
+    int work(const Platform& platform, companion::PathList& paths,
+             const foundation::FileDescriptor& signals) {
         const auto begun = retrieval::Clock::now();
         Coordinator coordinator(settings_, platform, paths, signals, events());
         const std::optional<int> signal = coordinator.run();
@@ -83,7 +69,7 @@ class Run {
             complain("the list holds no path");
             return EX_USAGE;
         }
-        if (signal) summary_.exitStatus = kSignalBase + *signal;
+        if (signal) summary_.exitStatus = companion::kSignalBase + *signal;
         return finish();
     }
 
@@ -121,8 +107,8 @@ class Run {
         summary_.count(report);
         if (journal_ && report.attempts > 0) {
             const auto state = stateOfCarrier(report.path, report.kind);
-            keep(journal_->add(canonicalPath(report.path), {report.exitStatus, report.cause, report.operation,
-                                                            state, report.recordName}));
+            keep(journal_->add(canonicalPath(report.path), {report.exitStatus, report.cause,
+                                                            settings_.operation, state, report.recordName}));
         }
         if (junit_) junit_->add(report);
         if (settings_.asJson) return print(asJson(report));
@@ -165,11 +151,11 @@ class Run {
     bool hasComplained_ = false;
 };
 
-int runBatch(const Settings& settings, int signals) {
+int runBatch(const Settings& settings, const foundation::FileDescriptor& signals) {
     // Lines are collected an artefact: a thread without one of them has nothing to print.
     verboseLevel = settings.isVerbose ? kVerbosityVerbose : kVerbosityQuiet;
 
-    auto paths = PathList::open(settings.paths, settings.from, settings.isZeroTerminated);
+    auto paths = companion::PathList::open(settings.paths, settings.from, settings.isZeroTerminated);
     if (!paths) {
         complain("the list cannot be read: " + paths.error().localizedDescription());
         return EX_NOINPUT;
@@ -219,8 +205,8 @@ int main(int argc, char** argv) {
     try {
         Settings settings;
         if (const auto status = readCommandLine(argc, argv, settings)) return *status;
-        const foundation::FileDescriptor signals = takeSignals();
-        return runBatch(settings, signals.get());
+        const foundation::FileDescriptor signals = companion::takeEndingSignals();
+        return runBatch(settings, signals);
     } catch (const std::exception& error) {
         complain(error.what());
         return EX_SOFTWARE;

@@ -1,30 +1,19 @@
-// What there is to say of each artefact as it ends, and of all of them at the end.
+// What there is to say of all artefacts of a batch at the end.
 #pragma once
 
 #include <array>
 #include <cstdint>
 #include <string>
-#include <vector>
+#include <string_view>
 
-#include "retrieval/artefact_run.h"
-#include "retrieval/cause.h"
+#include "retrieval/report.h"
 
 namespace pinwell::batch {
 
-struct Report {
-    std::string path;  // as given
-    std::uint8_t operation = 0;
-    retrieval::Kind kind = retrieval::Kind::none;
-    std::string recordName;  // empty if it is not known
-    int exitStatus = 0;
-    retrieval::Cause cause = retrieval::Cause::worked;
-    unsigned attempts = 0;  // 0: it was not begun
-    double seconds = 0;
-    std::vector<std::string> messages;
-};
+using retrieval::Report;
 
 struct Summary {
-    std::uint8_t operation = 0;
+    std::string_view operation;
     std::uint64_t total = 0;                  // reports
     std::uint64_t resumed = 0;                // done by an earlier run, and left out
     std::uint64_t duplicates = 0;             // paths of files that were named before
@@ -41,14 +30,10 @@ struct Summary {
 /// "staple" or "validate".
 std::string_view nameOfOperation(std::uint8_t operation) noexcept;
 
-/// One line of JSON, without its newline, as docs/batch.schema.json has it. Bytes that are no UTF-8 become
-/// U+FFFD.
-std::string asJson(const Report& report);
+/// One line of JSON, without its newline, as docs/batch.schema.json has it.
 std::string asJson(const Summary& summary);
 
-/// One line, without its newline, in the words of `pinwell`; in verbose mode all of them before it. Control
-/// characters are escaped.
-std::string asText(const Report& report, bool isVerbose, bool inColor);
+/// One line, without its newline.
 std::string asText(const Summary& summary);
 
 }  // namespace pinwell::batch

@@ -1,5 +1,6 @@
 #include "retrieval/artefact_run.h"
 
+#include <cerrno>
 #include <utility>
 
 #include "foundation/process.h"
@@ -81,13 +82,6 @@ foundation::Error missingAsset() {
             "The large ticket was not fetched."};
 }
 
-Kind kindOf(const PWHashedFile& file) {
-    if (dynamic_cast<const PWHashedBundle*>(&file) != nullptr) return Kind::bundle;
-    if (dynamic_cast<const PWHashedDiskImage*>(&file) != nullptr) return Kind::diskImage;
-    if (dynamic_cast<const PWHashedFlatPackage*>(&file) != nullptr) return Kind::package;
-    return Kind::none;
-}
-
 Cause causeOf(int status, const Answer& answer, const PWHashedFile& file) {
     switch (status) {
         case kExitOK:
@@ -148,6 +142,13 @@ std::string_view nameOf(Kind kind) noexcept {
     return "";
 }
 
+Kind kindOf(const PWHashedFile& file) {
+    if (dynamic_cast<const PWHashedBundle*>(&file) != nullptr) return Kind::bundle;
+    if (dynamic_cast<const PWHashedDiskImage*>(&file) != nullptr) return Kind::diskImage;
+    if (dynamic_cast<const PWHashedFlatPackage*>(&file) != nullptr) return Kind::package;
+    return Kind::none;
+}
+
 ArtefactRun::ArtefactRun(std::string path, std::uint8_t operation, const Platform& platform)
     : path_(std::move(path)), operation_(operation), platform_(platform) {}
 
@@ -162,7 +163,8 @@ std::optional<Outcome> ArtefactRun::begin() {
     return read();
 }
 
-std::optional<Outcome> ArtefactRun::read() {
+// Reads what the artefact is and its hash; nothing is judged yet.
+std::optional<Outcome> ArtefactRun::open() {
     messages_.clear();
     recordName_.clear();
     kind_ = Kind::none;
@@ -185,6 +187,12 @@ std::optional<Outcome> ArtefactRun::read() {
 
     reading.controller = std::make_unique<DownloadDelegate>(reading.file, reading.platform);
     reading.controller->setOperation(operation_);
+    return std::nullopt;
+}
+
+std::optional<Outcome> ArtefactRun::read() {
+    if (const auto ended = open()) return ended;
+    Reading& reading = *reading_;
     try {
         if (reading.controller->grabTicket()) return std::nullopt;
     } catch (const RunEnded& ended) {
@@ -206,6 +214,36 @@ std::optional<Outcome> ArtefactRun::end(const Answer& answer) {
         if (recordName_ != asked) return std::nullopt;
     }
     return finish(answer);
+}
+
+Outcome ArtefactRun::attach(
+    const std::function<foundation::Result<foundation::Data>(const std::string& recordName)>& ticketFor) {
+    const MessageRedirection redirection([this](std::string line) { messages_.push_back(std::move(line)); });
+    std::unique_ptr<files::ItemLock> lock;
+    if (!lockArtefact(platform_, URL::fileURLWithPath(path_), lock))
+        return {kExitCannotCreate, Cause::notWritable};
+    if (const auto ended = open()) return *ended;
+    if (recordName_.empty()) return {kExitNoInput, Cause::notSigned};
+    const auto ticket = ticketFor(recordName_);
+    if (!ticket) {
+        messages_.push_back(ticket.error().localizedDescription());
+        const bool isMissing =
+            ticket.error().domain() == foundation::kPOSIXErrorDomain && ticket.error().code() == ENOENT;
+        return isMissing ? Outcome{kExitDataError, Cause::notIssued}
+                         : Outcome{kExitNoInput, Cause::notReadable};
+    }
+    DownloadDelegate& controller = *reading_->controller;
+    controller.setTempFileURL(platform_.files.temporaryDirectory().appendingPathComponent(
+        foundation::globallyUniqueString() + ".ticket"));
+    int status = kExitNothingRecorded;
+    try {
+        controller.writeDownloadedData(*ticket, nullptr);
+        controller.notifyResult();
+    } catch (const RunEnded& ended) {
+        status = ended.status;
+    }
+    const Answer none;  // no service was asked
+    return {status, causeOf(status, none, *controller.hashedFile())};
 }
 
 bool ArtefactRun::isAsRead() const {

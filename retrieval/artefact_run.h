@@ -10,6 +10,7 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -18,6 +19,7 @@
 
 #include "retrieval/answer.h"
 #include "retrieval/cause.h"
+#include "src/PWHashedFile/PWHashedFile.h"
 #include "src/platform.h"
 
 namespace pinwell::retrieval {
@@ -33,6 +35,8 @@ enum class Kind : std::uint8_t { none, bundle, diskImage, package };
 
 /// "bundle", "diskImage", "package"; empty for `none`.
 std::string_view nameOf(Kind kind) noexcept;
+
+Kind kindOf(const PWHashedFile& file);
 
 /// For one thread at a time, which may be another one for each half.
 class ArtefactRun {
@@ -52,6 +56,12 @@ class ArtefactRun {
     /// its lock; `nullopt` if another record is to be looked up then.
     std::optional<Outcome> end(const Answer& answer);
 
+    /// Staples a ticket that is at hand, in place of begin() and end(): locks, reads, judges, writes and
+    /// reads back. `ticketFor` is called with the record's name; its error ends the run as notIssued if there
+    /// is no such file (ENOENT), and else as notReadable.
+    Outcome attach(
+        const std::function<foundation::Result<foundation::Data>(const std::string& recordName)>& ticketFor);
+
     /// Empty until begin() has found a hash.
     const std::string& recordName() const noexcept { return recordName_; }
     Kind kind() const noexcept { return kind_; }
@@ -64,6 +74,7 @@ class ArtefactRun {
 
   private:
     struct Reading;
+    std::optional<Outcome> open();
     std::optional<Outcome> read();
     std::optional<Outcome> finish(const Answer& answer);
     bool isAsRead() const;

@@ -1,4 +1,4 @@
-#include "batch/path_list.h"
+#include "companion/path_list.h"
 
 #include <fcntl.h>
 #include <poll.h>
@@ -8,10 +8,10 @@
 #include <cerrno>
 #include <utility>
 
-namespace pinwell::batch {
+namespace pinwell::companion {
 namespace {
 
-constexpr std::size_t kPieceSize = std::size_t{64} * 1024;
+constexpr std::size_t kListPieceSize = std::size_t{64} * 1024;
 
 }  // namespace
 
@@ -34,7 +34,7 @@ PathList::PathList(std::vector<std::string> paths, foundation::FileDescriptor fi
       file_(std::move(file)),
       name_(std::move(name)),
       separator_(separator),
-      buffer_(file_ ? kPieceSize : 0),
+      buffer_(file_ ? kListPieceSize : 0),
       ended_(!file_) {}
 
 PathList::State PathList::next(std::string& path) {
@@ -51,6 +51,15 @@ PathList::State PathList::next(std::string& path) {
         if (error_) return State::broken;
         if (ended_) return State::end;
         if (const State state = fill(); state != State::path) return state;
+    }
+}
+
+PathList::State PathList::nextOrWait(std::string& path) {
+    while (true) {
+        const State state = next(path);
+        if (state != State::wait) return state;
+        pollfd input{file_.get(), POLLIN, 0};
+        static_cast<void>(::poll(&input, 1, -1));
     }
 }
 
@@ -87,4 +96,4 @@ PathList::State PathList::fill() {
     return State::path;
 }
 
-}  // namespace pinwell::batch
+}  // namespace pinwell::companion

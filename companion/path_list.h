@@ -1,4 +1,4 @@
-// The paths of a batch, read as they are worked on: first those of the command line, then those of a file.
+// Paths or names, read as they are worked on: first those of the command line, then those of a file.
 #pragma once
 
 #include <cstdint>
@@ -10,7 +10,7 @@
 #include "foundation/error.h"
 #include "foundation/file_io.h"
 
-namespace pinwell::batch {
+namespace pinwell::companion {
 
 /// Longer ones name nothing (PATH_MAX), and are cut to this.
 inline constexpr std::size_t kLongestPath = 4096;
@@ -30,6 +30,9 @@ class PathList {
 
     /// The next path. Empty lines are passed over. Never blocks.
     State next(std::string& path);
+
+    /// The same, but it blocks where next() returns `wait`.
+    State nextOrWait(std::string& path);
 
     /// Of `wait`: readable when there is more.
     int descriptor() const noexcept { return file_.get(); }
@@ -57,4 +60,4 @@ class PathList {
     std::optional<foundation::Error> error_;
 };
 
-}  // namespace pinwell::batch
+}  // namespace pinwell::companion

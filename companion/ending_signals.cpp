@@ -1,0 +1,61 @@
+#include "companion/ending_signals.h"
+
+#include <poll.h>
+#include <sys/eventfd.h>
+#include <sys/signalfd.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <csignal>
+#include <cstdint>
+#include <system_error>
+#include <utility>
+
+namespace pinwell::companion {
+namespace {
+
+foundation::FileDescriptor owned(int number, const char* call) {
+    if (number < 0) throw std::system_error(errno, std::generic_category(), call);
+    return foundation::FileDescriptor(number);
+}
+
+}  // namespace
+
+foundation::FileDescriptor takeEndingSignals() {
+    sigset_t ending;
+    sigemptyset(&ending);
+    for (const int number : {SIGHUP, SIGINT, SIGTERM}) {
+        struct sigaction now {};
+        sigaction(number, nullptr, &now);
+        if (now.sa_handler != SIG_IGN) sigaddset(&ending, number);
+    }
+    pthread_sigmask(SIG_BLOCK, &ending, nullptr);
+    return owned(::signalfd(-1, &ending, SFD_CLOEXEC | SFD_NONBLOCK), "signalfd");
+}
+
+std::optional<int> nextEndingSignal(const foundation::FileDescriptor& signals) {
+    signalfd_siginfo info{};
+    if (::read(signals.get(), &info, sizeof info) != sizeof info) return std::nullopt;
+    return static_cast<int>(info.ssi_signo);
+}
+
+SignalWatch::SignalWatch(foundation::FileDescriptor signals, std::function<void(int number)> react)
+    : signals_(std::move(signals)),
+      end_(owned(::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK), "eventfd")),
+      thread_([this, react = std::move(react)] {
+          while (true) {
+              std::array<pollfd, 2> sources{pollfd{signals_.get(), POLLIN, 0}, pollfd{end_.get(), POLLIN, 0}};
+              if (::poll(sources.data(), sources.size(), -1) < 0 && errno != EINTR) return;
+              if (sources.at(1).revents != 0) return;
+              if (const auto number = nextEndingSignal(signals_)) return react(*number);
+          }
+      }) {}
+
+SignalWatch::~SignalWatch() {
+    const std::uint64_t one = 1;
+    [[maybe_unused]] const ssize_t ignored = ::write(end_.get(), &one, sizeof one);
+    thread_.join();
+}
+
+}  // namespace pinwell::companion

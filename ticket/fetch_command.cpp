@@ -1,0 +1,185 @@
+#include <sys/stat.h>
+#include <sysexits.h>
+
+#include <atomic>
+#include <cerrno>
+#include <ctime>
+#include <set>
+#include <utility>
+
+#include "codesign/digest.h"
+#include "companion/ending_signals.h"
+#include "companion/path_list.h"
+#include "foundation/format.h"
+#include "retrieval/ticket_fetch.h"
+#include "ticket/artefact.h"
+#include "ticket/commands.h"
+#include "ticket/file_writing.h"
+#include "ticket/index.h"
+
+namespace pinwell::ticket_files {
+namespace {
+
+using retrieval::Cause;
+using retrieval::Report;
+
+std::string timeText() {
+    const std::time_t now = std::time(nullptr);
+    std::tm utc{};
+    ::gmtime_r(&now, &utc);
+    std::array<char, 32> text{};
+    const std::size_t length = std::strftime(text.data(), text.size(), "%Y-%m-%dT%H:%M:%SZ", &utc);
+    return {text.data(), length};
+}
+
+/// One run of the command.
+class Fetching {
+  public:
+    Fetching(const Settings& settings, const Platform& platform)
+        : settings_(settings), platform_(platform), reporter_(settings) {}
+
+    int run() {
+        if (!prepare()) return reporter_.exitStatus();
+        if (!listNames()) return reporter_.exitStatus();
+        retrieval::FetchOptions options;
+        options.retry = settings_.retry;
+        options.wait = settings_.wait;
+        if (settings_.deadline)
+            options.deadline = retrieval::Clock::now() +
+                               std::chrono::duration_cast<retrieval::Clock::duration>(*settings_.deadline);
+        std::atomic<int> signal = 0;
+        {
+            retrieval::Cancellation cancellation;
+            const companion::SignalWatch watch(std::move(signals_), [&](int number) {
+                signal = number;
+                cancellation.cancel();
+            });
+            retrieval::fetchTickets(names_, options, platform_, cancellation,
+                                    [this](std::size_t index, retrieval::FetchedTicket ticket) {
+                                        take(index, std::move(ticket));
+                                    });
+        }
+        if (const auto written = index_.write(*settings_.output); !written)
+            reporter_.complain("the index cannot be written: " + written.error().localizedDescription(),
+                               kExitCannotCreate);
+        return signal != 0 ? companion::kSignalBase + signal : reporter_.exitStatus();
+    }
+
+  private:
+    bool prepare() {
+        if (::mkdir(settings_.output->c_str(), 0777) != 0 && errno != EEXIST) {
+            reporter_.complain("the directory cannot be made: " +
+                                   foundation::Error::posix(errno, *settings_.output).localizedDescription(),
+                               kExitCannotCreate);
+            return false;
+        }
+        auto index = Index::read(*settings_.output);
+        if (!index) {
+            reporter_.complain("the index cannot be used: " + index.error().localizedDescription(),
+                               kExitCannotCreate);
+            return false;
+        }
+        index_ = *std::move(index);
+        signals_ = companion::takeEndingSignals();
+        return true;
+    }
+
+    // Record names as they are; everything else is the path of an artefact.
+    bool listNames() {
+        auto list =
+            companion::PathList::open(settings_.arguments, settings_.from, settings_.isZeroTerminated);
+        if (!list) {
+            reporter_.complain("the list cannot be read: " + list.error().localizedDescription(),
+                               kExitNoInput);
+            return false;
+        }
+        bool isEmpty = true;
+        std::string argument;
+        companion::PathList::State state{};
+        while ((state = list->nextOrWait(argument)) == companion::PathList::State::path) {
+            isEmpty = false;
+            if (retrieval::hashInRecordName(argument)) {
+                want({}, argument);
+                continue;
+            }
+            OpenedArtefact artefact = openArtefact(argument, "fetch", platform_);
+            if (artefact.file != nullptr && artefact.hash.empty()) {
+                artefact.report.exitStatus = kExitNoInput;
+                artefact.report.cause = Cause::notSigned;
+            }
+            if (artefact.report.exitStatus != kExitOK) {
+                reporter_.report(artefact.report);
+                continue;
+            }
+            artefact.report.messages.clear();
+            const std::string name = artefact.report.recordName;
+            want(std::move(artefact.report), name);
+        }
+        if (state == companion::PathList::State::broken) {
+            reporter_.complain(
+                "the list cannot be read any further: " + list->error()->localizedDescription(),
+                kExitNoInput);
+            return false;
+        }
+        if (isEmpty) {
+            reporter_.complain("the list holds no name", EX_USAGE);
+            return false;
+        }
+        return true;
+    }
+
+    // A record that is named twice is fetched once, and reported for the first that named it.
+    void want(Report report, const std::string& recordName) {
+        if (!known_.insert(recordName).second) return;
+        report.operation = "fetch";
+        report.recordName = recordName;
+        names_.push_back(recordName);
+        reports_.push_back(std::move(report));
+    }
+
+    void take(std::size_t number, retrieval::FetchedTicket ticket) {
+        Report& report = reports_[number];
+        report.exitStatus = ticket.exitStatus;
+        report.cause = ticket.cause;
+        report.attempts = ticket.attempts;
+        report.seconds = ticket.seconds;
+        report.messages = std::move(ticket.messages);
+        if (!ticket.ticket.empty()) keep(ticket, report);
+        reporter_.report(report);
+        report = {};
+    }
+
+    void keep(const retrieval::FetchedTicket& ticket, Report& report) {
+        const std::string file = fileNameOfRecord(ticket.recordName);
+        report.file = file;
+        if (const auto written = replaceFile(ticket.ticket, *settings_.output + "/" + file); !written) {
+            report.messages.push_back(foundation::format("Could not write the ticket to %@. %@", file,
+                                                         written.error().localizedFailureReason()));
+            report.exitStatus = retrieval::worseStatus(report.exitStatus, kExitCannotCreate);
+            if (report.exitStatus == kExitCannotCreate) report.cause = Cause::notWritable;
+            return;
+        }
+        if (ticket.cause == Cause::worked)
+            report.messages.push_back(foundation::format("The ticket has been written to %@.", file));
+        index_.set(ticket.recordName,
+                   {file, foundation::toHex(codesign::digest(codesign::DigestType::sha256, ticket.ticket)),
+                    timeText(), ticket.cause == Cause::revoked});
+    }
+
+    const Settings& settings_;
+    const Platform platform_;
+    Reporter reporter_;
+    Index index_;
+    foundation::FileDescriptor signals_;
+    std::set<std::string> known_;
+    std::vector<std::string> names_;
+    std::vector<Report> reports_;  // one a name
+};
+
+}  // namespace
+
+int fetch(const Settings& settings, const Platform& platform) {
+    return Fetching(settings, platform).run();
+}
+
+}  // namespace pinwell::ticket_files

@@ -1,0 +1,168 @@
+// pinwell-ticket: tickets as files.
+#include <malloc.h>
+#include <sysexits.h>
+
+#include <array>
+#include <csignal>
+#include <exception>
+#include <string_view>
+#include <utility>
+
+#include "companion/command_line.h"
+#include "foundation/process.h"
+#include "src/host_platform.h"
+#include "src/messages.h"
+#include "ticket/commands.h"
+
+namespace {
+
+using namespace pinwell;
+using namespace pinwell::ticket_files;
+using companion::Option;
+using Wrong = std::optional<std::string>;
+
+constexpr std::uint64_t kMostRetries = 1000;
+
+Option flag(const char* name, char letter, const char* help, bool& value) {
+    return {name, letter, "", help, [&value](const std::string&) {
+                value = true;
+                return Wrong();
+            }};
+}
+
+Option text(const char* name, char letter, const char* argument, const char* help,
+            std::optional<std::string>& value) {
+    return {name, letter, argument, help, [&value](const std::string& given) -> Wrong {
+                if (given.empty()) return "is empty";
+                value = given;
+                return std::nullopt;
+            }};
+}
+
+std::vector<Option> withCommon(std::vector<Option> options, Settings& settings) {
+    options.push_back(flag("json", 0, "Print one JSON object each, on a line", settings.asJson));
+    options.push_back({"color", 0, "WHEN", "Colour the lines: auto, always or never (default: auto)",
+                       [&](const std::string& given) {
+                           static constexpr std::array<std::string_view, 3> kWords{"auto", "always", "never"};
+                           std::string word;
+                           const Wrong wrong = companion::takeWord(given, kWords, word);
+                           settings.color = companion::colorWhenNamed(word);
+                           return wrong;
+                       }});
+    options.push_back({"quiet", 'q', "", "Print nothing but JSON", [&](const std::string&) {
+                           settings.isQuiet = true;
+                           settings.isVerbose = false;
+                           return Wrong();
+                       }});
+    options.push_back({"verbose", 'v', "", "Print all that pinwell -v says", [&](const std::string&) {
+                           settings.isVerbose = true;
+                           settings.isQuiet = false;
+                           return Wrong();
+                       }});
+    return options;
+}
+
+std::vector<Option> fetchOptions(Settings& settings) {
+    return {
+        text("from", 0, "FILE", "Read names from a file, one a line; - is standard input", settings.from),
+        flag("null", '0', "A zero byte ends each name of that file, not a newline",
+             settings.isZeroTerminated),
+        text("out", 'o', "DIR", "The directory to put them in (needed)", settings.output),
+        {"retries", 0, "N", "How often to try again what is out of reach (default: 5)",
+         [&](const std::string& given) {
+             std::uint64_t number = 0;
+             const Wrong wrong = companion::takeCount(given, 0, kMostRetries, number);
+             settings.retry.retries = static_cast<unsigned>(number);
+             return wrong;
+         }},
+        {"retry-delay", 0, "SECONDS", "Before the first of these tries; doubled each time (default: 1)",
+         [&](const std::string& given) { return companion::takeSeconds(given, settings.retry.firstDelay); }},
+        {"wait", 0, "SECONDS", "Ask again for so long for tickets that are not issued yet",
+         [&](const std::string& given) { return companion::takeSeconds(given, settings.wait); }},
+        {"deadline", 0, "SECONDS", "The time that all of them may take",
+         [&](const std::string& given) {
+             return companion::takeSeconds(given, settings.deadline.emplace());
+         }},
+    };
+}
+
+companion::Program programFor(Settings& settings) {
+    return {
+        .name = kProgramName,
+        .version = PINWELL_VERSION,
+        .help =
+            "Fetches tickets into files, and takes them from there to artefacts and back. Only fetch uses "
+            "the\n"
+            "network.",
+        .epilogue =
+            "Exit status: the worst of all, as pinwell's: 77 revoked, 73 not written, 65 no good ticket,\n"
+            "66 no artefact, 68 service out of reach, 0 all is well; 64 wrong usage.",
+        .commands = {
+            {"hash", "PATH...", "Prints the record name of each artefact.", withCommon({}, settings)},
+            {"fetch", "NAME...", "Fetches tickets by record name, or for artefacts by their path.",
+             withCommon(fetchOptions(settings), settings)},
+            {"attach", "PATH...", "Attaches tickets from files.",
+             withCommon({text("tickets", 0, "DIR", "A directory that fetch has filled", settings.tickets),
+                         text("ticket", 0, "FILE", "One ticket, for all of the artefacts", settings.ticket)},
+                        settings)},
+            {"extract", "PATH", "Writes the ticket of an artefact to a new file.",
+             withCommon({text("output", 'o', "FILE", "The file to make (default: named by the record)",
+                              settings.output)},
+                        settings)},
+            {"remove", "PATH...", "Removes the ticket of each artefact.", withCommon({}, settings)},
+        }};
+}
+
+int refuse(const std::string& what) {
+    companion::complain(kProgramName, what);
+    return EX_USAGE;
+}
+
+// What the options of a command do not say by themselves.
+std::optional<int> refuseUsage(const std::string& command, const Settings& settings) {
+    if (settings.arguments.empty() && !settings.from)
+        return refuse(command == "fetch" ? "no name is given; name some, or a list of them with --from"
+                                         : "no path is given");
+    if (command == "fetch" && !settings.output) return refuse("fetch needs --out DIR");
+    if (command == "attach" && !settings.tickets && !settings.ticket)
+        return refuse("attach needs --tickets DIR or --ticket FILE");
+    if (command == "attach" && settings.tickets && settings.ticket)
+        return refuse("attach takes --tickets or --ticket, not both");
+    if (command == "extract" && settings.arguments.size() > 1) return refuse("extract takes one path");
+    return std::nullopt;
+}
+
+int run(int argc, char** argv) {
+    Settings settings;
+    const companion::Program program = programFor(settings);
+    companion::Parsed parsed = companion::parseCommand(program, argc, argv);
+    if (parsed.exitStatus) return *parsed.exitStatus;
+    settings.arguments = std::move(parsed.arguments);
+    const std::string& command = parsed.command->name;
+    if (const auto status = refuseUsage(command, settings)) return *status;
+
+    // Lines are collected an artefact: what is not collected is not printed.
+    verboseLevel = settings.isVerbose ? kVerbosityVerbose : kVerbosityQuiet;
+    const HostPlatform host([](int) {});
+    if (command == "hash") return hash(settings, host.services());
+    if (command == "fetch") return fetch(settings, host.services());
+    if (command == "attach") return attach(settings, host.services());
+    if (command == "extract") return extract(settings, host.services());
+    return ticket_files::remove(settings, host.services());
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+    mallopt(M_ARENA_MAX, 1);
+    foundation::occupyStandardStreams();
+    // A reader that has gone away, and a file that would grow beyond the caller's limit, are failed writes.
+    std::signal(SIGPIPE, SIG_IGN);
+    std::signal(SIGXFSZ, SIG_IGN);
+    try {
+        return run(argc, argv);
+    } catch (const std::exception& error) {
+        companion::complain(kProgramName, error.what());
+        return EX_SOFTWARE;
+    }
+}

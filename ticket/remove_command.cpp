@@ -1,0 +1,94 @@
+#include "companion/own_temporary_directory.h"
+#include "foundation/format.h"
+#include "src/PWHashedFile/PWHashedBundle.h"
+#include "src/messages.h"
+#include "src/run.h"
+#include "ticket/artefact.h"
+#include "ticket/commands.h"
+
+namespace pinwell::ticket_files {
+namespace {
+
+using retrieval::Cause;
+
+// False if the deletion failed; the error says why where that is known.
+bool deleteTicket(PWHashedFile& file, std::optional<Error>& error) {
+    if (auto* const bundle = dynamic_cast<PWHashedBundle*>(&file)) return bundle->_deleteExistingTicket();
+    return file._deleteExistingTicket(&error) && !error;
+}
+
+retrieval::Report removeTicket(const std::string& path, const Platform& platform) {
+    std::vector<std::string> messages;
+    const MessageRedirection redirection([&](std::string line) { messages.push_back(std::move(line)); });
+    std::unique_ptr<files::ItemLock> lock;
+    if (!lockArtefact(platform, URL::fileURLWithPath(path), lock)) {
+        retrieval::Report report;
+        report.path = path;
+        report.operation = "remove";
+        report.exitStatus = kExitCannotCreate;
+        report.cause = Cause::notWritable;
+        report.attempts = 1;
+        report.messages = std::move(messages);
+        return report;
+    }
+    OpenedArtefact artefact = openArtefact(path, "remove", platform);
+    retrieval::Report& report = artefact.report;
+    if (artefact.file == nullptr) return report;
+    const std::string name = artefact.file->fileURL()->lastPathComponent();
+    const auto end = [&](int status, Cause cause, std::string message) {
+        report.messages.insert(report.messages.end(), messages.begin(), messages.end());
+        report.exitStatus = status;
+        report.cause = cause;
+        report.messages.push_back(std::move(message));
+        return report;
+    };
+    if (!artefact.file->ticketData())
+        return end(kExitDataError, Cause::notStapled,
+                   foundation::format("%@ does not have a ticket stapled to it.", name));
+    std::optional<Error> error;
+    if (!deleteTicket(*artefact.file, error))
+        return end(kExitCannotCreate,
+                   artefact.file->wasRefusedAsChanged() ? Cause::changed : Cause::notWritable,
+                   error ? foundation::format("The ticket of %@ could not be removed. %@", name, error)
+                         : foundation::format("The ticket of %@ could not be removed.", name));
+    // From the disk, by a new object.
+    const auto fresh = PWHashedFile::initWithFileURL(URL::fileURLWithPath(path), platform);
+    if (fresh == nullptr || fresh->appropriateExitCode() != kExitOK)
+        return end(kExitCannotCreate, Cause::notWritable,
+                   foundation::format("%@ cannot be read any more. Please restore it from backup.", name));
+    if (fresh->ticketData()) {
+        // Known of disk images: without the ticket there would be no signature left, and none is taken away.
+        return end(
+            kExitOK, Cause::worked,
+            foundation::format("The ticket of %@ is all that its signature holds: it stays in place.", name));
+    }
+    return end(kExitOK, Cause::worked, foundation::format("The ticket of %@ has been removed.", name));
+}
+
+}  // namespace
+
+int remove(const Settings& settings, const Platform& platform) {
+    Reporter reporter(settings);
+    auto temporary = companion::OwnTemporaryDirectory::make(kProgramName);
+    if (!temporary) {
+        reporter.complain("no temporary directory can be made: " + temporary.error().localizedDescription(),
+                          kExitCannotCreate);
+        return reporter.exitStatus();
+    }
+    bool wroteAll = true;
+    for (const std::string& path : settings.arguments) {
+        const auto begun = retrieval::Clock::now();
+        retrieval::Report report = removeTicket(path, platform);
+        report.seconds = std::chrono::duration<double>(retrieval::Clock::now() - begun).count();
+        wroteAll = wroteAll && report.exitStatus != kExitCannotCreate;
+        reporter.report(report);
+    }
+    // With them a write that was cut short can be put right.
+    if (wroteAll || !temporary->holdsFiles())
+        temporary->remove();
+    else if (!settings.isQuiet)
+        reporter.complain("copies are kept in " + temporary->path(), kExitOK);
+    return reporter.exitStatus();
+}
+
+}  // namespace pinwell::ticket_files
