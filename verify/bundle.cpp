@@ -56,7 +56,7 @@ VerifiedCode verifySeparately(const codesign::ByteSource& executable, const Bund
     return {.isSigned = true, .identities = {identityOf(*parts, place)}};
 }
 
-std::string joined(const std::string& a, const std::string& b) {
+std::string joinedPlace(const std::string& a, const std::string& b) {
     return a.empty() || b.empty() ? a + b : a + "/" + b;
 }
 
@@ -65,8 +65,8 @@ std::string joined(const std::string& a, const std::string& b) {
 VerifiedCode verifyBundleAt(const std::string& path, const std::string& place, WalkState& state,
                             Section& section) {
     const BundleLayout layout = layoutOfBundle(path);
-    const std::string rootPlace = joined(place, layout.rootPath);
-    const std::string executablePlace = joined(rootPlace, layout.executable);
+    const std::string rootPlace = joinedPlace(place, layout.rootPath);
+    const std::string executablePlace = joinedPlace(rootPlace, layout.executable);
     section.place = place;
 
     const std::optional<Data> list = componentAt(layout.root, layout.propertyList);
@@ -79,7 +79,7 @@ VerifiedCode verifyBundleAt(const std::string& path, const std::string& place, W
         isImage ? verifyExecutable(*executable, outside, executablePlace, state.workers, section)
                 : verifySeparately(*executable, layout, outside, executablePlace, state.workers, section);
 
-    const std::string sealPlace = joined(rootPlace, kSignatureDirectory + "/" + kSealFile);
+    const std::string sealPlace = joinedPlace(rootPlace, kSignatureDirectory + "/" + kSealFile);
     if (!code.isSigned && !document) return code;
     code.isSigned = true;
     if (!document) {

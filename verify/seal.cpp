@@ -25,7 +25,6 @@ struct Seal::Rule {
 namespace {
 
 constexpr std::size_t kSha1Length = 20;
-constexpr std::size_t kSha256Length = 32;
 constexpr std::size_t kMaximumRequirementLength = 65'536;
 
 bool isRelativePath(std::string_view path) {

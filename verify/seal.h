@@ -45,6 +45,9 @@ using foundation::Data;
 inline constexpr std::size_t kMaximumRules = 128;
 inline constexpr std::size_t kMaximumPatternLength = 4096;
 
+/// Of a digest that is a file's SHA-256, in bytes.
+inline constexpr std::size_t kSha256Length = 32;
+
 /// What each pattern may take of memory, in bytes.
 inline constexpr std::size_t kMaximumPatternMemory = std::size_t{256} * 1024;
 

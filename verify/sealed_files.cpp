@@ -17,8 +17,6 @@ namespace {
 /// Enough that no thread waits long for the others. Every job may hold a directory open.
 constexpr std::size_t kBatchSize = 256;
 
-constexpr std::size_t kSha256Length = 32;
-
 }  // namespace
 
 SealedFiles::SealedFiles(Workers& workers, Section& section) : workers_(workers), section_(section) {

@@ -17,7 +17,7 @@ struct Phase {
     int code = kConnectionLost;  // of a failure there
 };
 
-std::string titleOf(const testing::TestParamInfo<Phase>& tested) {
+std::string titleOfPhase(const testing::TestParamInfo<Phase>& tested) {
     return tested.param.title;
 }
 
@@ -95,7 +95,7 @@ TEST_P(BrokenConnection, ASilenceOfTheLookupCanBeInterrupted) {
     expectUntouched();
 }
 
-INSTANTIATE_TEST_SUITE_P(Server, BrokenConnection, testing::ValuesIn(phases()), titleOf);
+INSTANTIATE_TEST_SUITE_P(Server, BrokenConnection, testing::ValuesIn(phases()), titleOfPhase);
 
 class SlowServer : public EndToEndTest {};
 

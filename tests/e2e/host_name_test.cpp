@@ -59,7 +59,7 @@ class HostNameTest : public EndToEndTest {
     }
 };
 
-std::string titleOf(const testing::TestParamInfo<NameRow>& row) {
+std::string titleOfName(const testing::TestParamInfo<NameRow>& row) {
     return row.param.title;
 }
 
@@ -79,7 +79,7 @@ INSTANTIATE_TEST_SUITE_P(
                     NameRow{"Second", "DNS:www.lumora.example,DNS:api.lumora.example"},
                     NameRow{"WildcardForTheFirstLabel", "DNS:*.lumora.example"},
                     NameRow{"BesidesAMisplacedWildcard", "DNS:api.*.example,DNS:api.lumora.example"}),
-    titleOf);
+    titleOfName);
 
 class BadName : public HostNameTest, public testing::WithParamInterface<NameRow> {};
 
@@ -111,7 +111,7 @@ INSTANTIATE_TEST_SUITE_P(Server, BadName,
                                          NameRow{"WildcardAndADotAtTheEnd", "DNS:*.lumora.example."},
                                          NameRow{"AddressInstead", "IP:127.0.0.1"},
                                          NameRow{"AsAURL", "URI:https://api.lumora.example/"}),
-                         titleOf);
+                         titleOfName);
 
 // A dot at the end, which makes a name absolute and names the same host.
 

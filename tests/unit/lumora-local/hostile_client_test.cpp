@@ -8,10 +8,9 @@
 namespace pinwell::lumora {
 namespace {
 
+using test::kLookupPath;
 using test::RawClient;
 using test::RunningService;
-
-constexpr const char* kPath = "/database/1/com.ostrel.tm.ticket-delivery/production/public/records/lookup";
 
 class HostileClient : public testing::Test {
   protected:
@@ -30,7 +29,7 @@ class HostileClient : public testing::Test {
     }
 
     static std::string lookupHead(const std::string& headers) {
-        return std::string("POST ") + kPath +
+        return std::string("POST ") + kLookupPath +
                " HTTP/1.1\r\nHost: localhost\r\nContent-Type: application/json\r\n" + headers + "\r\n";
     }
 
@@ -100,12 +99,12 @@ TEST_F(HostileClient, SendsWhatIsNoHttp) {
 
 TEST_F(HostileClient, SendsTooLargeABody) {
     const auto client = service_.client();
-    const auto result = client->Post(kPath, std::string(1024 * 1024 + 1, ' '), "application/json");
+    const auto result = client->Post(kLookupPath, std::string(1024 * 1024 + 1, ' '), "application/json");
     ASSERT_TRUE(result) << httplib::to_string(result.error());
     EXPECT_EQ(result->status, 413);
     EXPECT_NE(result->body.find("PAYLOAD_TOO_LARGE"), std::string::npos);
 
-    const auto largest = client->Post(kPath, std::string(1024 * 1024, ' '), "application/json");
+    const auto largest = client->Post(kLookupPath, std::string(1024 * 1024, ' '), "application/json");
     ASSERT_TRUE(largest);
     EXPECT_EQ(largest->status, 400);  // read whole, and no JSON
 }
@@ -171,7 +170,7 @@ TEST_F(HostileClient, SendsSeveralRequestsAtOnce) {
 
 TEST_F(HostileClient, NestsDeeply) {
     const std::string body(500'000, '[');
-    const auto result = service_.client()->Post(kPath, body, "application/json");
+    const auto result = service_.client()->Post(kLookupPath, body, "application/json");
     ASSERT_TRUE(result);
     EXPECT_EQ(result->status, 400);
 }

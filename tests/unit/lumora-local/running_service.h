@@ -18,6 +18,10 @@ class SSLClient;
 
 namespace pinwell::lumora::test {
 
+/// Where records are asked for.
+inline constexpr const char* kLookupPath =
+    "/database/1/com.ostrel.tm.ticket-delivery/production/public/records/lookup";
+
 struct Outcome {
     int exitStatus = -1;  // 128 and the signal's number when one ended the program
     std::string out;

@@ -17,10 +17,10 @@ namespace {
 using foundation::Data;
 using foundation::Value;
 using pinwell::test::readFile;
+using test::kLookupPath;
 using test::RawClient;
 using test::RunningService;
 
-constexpr const char* kPath = "/database/1/com.ostrel.tm.ticket-delivery/production/public/records/lookup";
 constexpr const char* kIdentifier = "X-Ostrel-Request-UUID";
 
 CodeHash hashOf(int fill) {
@@ -41,7 +41,7 @@ Value parse(const std::string& text) {
 }
 
 httplib::Result lookup(httplib::SSLClient& client, const std::vector<std::string>& names) {
-    return client.Post(kPath, bodyFor(names), "application/json");
+    return client.Post(kLookupPath, bodyFor(names), "application/json");
 }
 
 TEST(Serve, AnswersALookupOverATrustedConnection) {
@@ -106,7 +106,7 @@ TEST(Serve, NamesEveryRequestDifferently) {
     note(lookup(*client, {"unknown"}));
     note(client->Get("/nothing"));
     note(client->Get("/healthz"));
-    note(client->Post(kPath, "{", "application/json"));
+    note(client->Post(kLookupPath, "{", "application/json"));
     EXPECT_EQ(identifiers.size(), 5U);
     EXPECT_FALSE(identifiers.contains(""));
 }
@@ -195,7 +195,7 @@ TEST(Serve, FinishesARequestThatHasBegunBeforeItStops) {
     const std::string body = bodyFor({"unknown"});
     RawClient client(service);
     // The interim answer proves that the request has begun when the signal is sent.
-    ASSERT_TRUE(client.send(std::string("POST ") + kPath +
+    ASSERT_TRUE(client.send(std::string("POST ") + kLookupPath +
                             " HTTP/1.1\r\nHost: localhost\r\nContent-Type: application/json\r\n"
                             "Expect: 100-continue\r\nContent-Length: " +
                             std::to_string(body.size()) + "\r\n\r\n"));
