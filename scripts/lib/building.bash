@@ -1,0 +1,62 @@
+# How the scripts build: one line of progress, and the first errors when it fails. Sourced.
+
+# A clone finds the objects of another one in ccache, and no compiler is asked again for what it has said already.
+export CCACHE_BASEDIR=${CCACHE_BASEDIR:-$PWD} CCACHE_NOHASHDIR=${CCACHE_NOHASHDIR:-1}
+
+# first_errors LOG: what the first failed steps of a build said, without the compilers' long command lines.
+first_errors() {
+  awk '
+    /^FAILED: / { failed = 1; count++; if (count <= 3) print; command = 1; next }
+    command { command = 0; next }
+    /^\[[0-9]+\/[0-9]+\] / { failed = 0 }
+    failed && count <= 3 && lines < 60 { print; lines++ }
+  ' "$1" > "$1.errors"
+  # It may have ended before the first step, or without one that says so.
+  if [ -s "$1.errors" ]; then cat "$1.errors"; else grep -m 20 -iE -A 5 'error' "$1" || tail -n 20 "$1"; fi
+  rm -f "$1.errors"
+}
+
+# last_step LOG: how far a build has come, in ninja's own words.
+last_step() { grep -aE '^\[[0-9]+/[0-9]+\] ' "$1" 2> /dev/null | tail -n 1; }
+
+# watch_build LOG: shows the last step of a build, on a terminal in place and elsewhere once a minute. Runs until it is
+# ended.
+watch_build() {
+  local step shown='' seconds=0 columns
+  if [ -t 1 ]; then
+    columns=$(tput cols 2> /dev/null || echo 80)
+    while sleep 0.3; do
+      step=$(last_step "$1")
+      [ "$step" = "$shown" ] || printf '\r\033[K%s' "${step:0:$((columns - 1))}"
+      shown=$step
+    done
+  else
+    while sleep 1; do
+      seconds=$((seconds + 1))
+      [ $((seconds % 60)) -eq 0 ] || continue
+      step=$(last_step "$1")
+      echo "   ${step:-configuring}"
+    done
+  fi
+}
+
+# build_preset PRESET [OPTION...] [TARGET...]: configures, with options of cmake that begin with -D, and builds;
+# build/PRESET/build.log has all that was said. Ends with the first errors and the log's name, and with 1, when it fails.
+build_preset() {
+  local preset=$1 log=build/$1/build.log watcher status=0 options=()
+  shift
+  while [[ ${1:-} == -D* ]]; do options+=("$1") && shift; done
+  mkdir -p "build/$preset"
+  : > "$log"
+  watch_build "$log" &
+  watcher=$!
+  { cmake --preset "$preset" "${options[@]}" && cmake --build --preset "$preset" ${1:+--target "$@"}; } > "$log" 2>&1 || status=1
+  kill $watcher 2> /dev/null || true
+  wait $watcher 2> /dev/null || true
+  [ ! -t 1 ] || printf '\r\033[K'
+  [ $status -ne 0 ] || return 0
+  echo "The build failed. The first errors:"
+  first_errors "$log"
+  echo "All that was said is in $log."
+  return 1
+}
