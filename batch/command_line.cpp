@@ -108,7 +108,6 @@ std::optional<int> readCommandLine(int argc, char** argv, Settings& settings) {
     settings.jobs = std::max(std::thread::hardware_concurrency(), 1U);
     const companion::Program program{
         .name = kProgramName,
-        .version = PINWELL_VERSION,
         .help = "Staples or validates many artefacts at once, as pinwell does each of them.",
         .epilogue =
             "Exit status: the worst of all artefacts, in the order 77 revoked, 73 not written, 65 no good\n"

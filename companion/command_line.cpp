@@ -9,6 +9,7 @@
 #include <cstdlib>
 #include <numeric>
 
+#include "companion/version.h"
 #include "foundation/description.h"
 
 namespace pinwell::companion {
@@ -118,7 +119,7 @@ class Reader {
                 write(STDOUT_FILENO, helpOf(program_, command_));
                 return EX_OK;
             case 'V':
-                write(STDOUT_FILENO, program_.name + " " + program_.version + "\n");
+                write(STDOUT_FILENO, versionText(program_.name) + "\n");
                 return EX_OK;
             case ':':
                 return refuse("the option " + nameOfWord(word) + " needs a value");
@@ -201,7 +202,7 @@ Parsed parseCommand(const Program& program, int argc, char** argv) {
         return {.exitStatus = EX_OK, .command = nullptr, .arguments = {}};
     }
     if (first == "--version") {
-        write(STDOUT_FILENO, program.name + " " + program.version + "\n");
+        write(STDOUT_FILENO, versionText(program.name) + "\n");
         return {.exitStatus = EX_OK, .command = nullptr, .arguments = {}};
     }
     std::vector<std::string_view> names;

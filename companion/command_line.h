@@ -42,7 +42,6 @@ struct Command {
 
 struct Program {
     std::string name;
-    std::string version;
     std::string help;      // one sentence or two
     std::string epilogue;  // below the options: exit statuses, for instance
     std::vector<Command> commands;

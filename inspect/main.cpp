@@ -6,11 +6,13 @@
 #include <algorithm>
 #include <csignal>
 #include <cstdio>
-#include <cstdlib>
 #include <exception>
 #include <string>
 #include <vector>
 
+#include "companion/output.h"
+#include "companion/parse_errors.h"
+#include "companion/version.h"
 #include "foundation/format.h"
 #include "foundation/process.h"
 #include "inspect/gather.h"
@@ -26,6 +28,7 @@ using namespace pinwell;
 struct Arguments {
     std::vector<std::string> paths;
     bool asJson = false;
+    companion::ColorWhen color = companion::ColorWhen::automatic;
 };
 
 void complain(std::string_view text) {
@@ -33,32 +36,23 @@ void complain(std::string_view text) {
     std::fwrite(line.data(), 1, line.size(), stderr);
 }
 
-bool write(const std::string& text) {
-    return std::fwrite(text.data(), 1, text.size(), stdout) == text.size() && std::fflush(stdout) == 0;
-}
-
-/// Only where somebody sees it, and never against their wish (https://no-color.org).
-bool wantsColour() {
-    const char* const noColour = std::getenv("NO_COLOR");
-    const char* const terminal = std::getenv("TERM");
-    const bool dumb = terminal != nullptr && std::string_view(terminal) == "dumb";
-    return isatty(STDOUT_FILENO) == 1 && !dumb && (noColour == nullptr || *noColour == '\0');
-}
-
 int inspectAll(const Arguments& arguments) {
     // What the tool's own functions would say is in the report.
     verboseLevel = kVerbosityQuiet;
     const HostPlatform host([](int) {});
     const inspect::Inspector inspector(host.services());
-    const bool colour = wantsColour();
+    const bool inColor = companion::wantsColor(arguments.color, STDOUT_FILENO);
+    companion::Output output(STDOUT_FILENO);
     int worst = EX_OK;
     bool first = true;
     for (const std::string& path : arguments.paths) {
         const inspect::Report report = inspector.inspect(path);
-        const std::string text = arguments.asJson ? inspect::renderJson(report)
-                                                  : (first ? "" : "\n") + inspect::renderText(report, colour);
+        const std::string text = arguments.asJson
+                                     ? inspect::renderJson(report)
+                                     : (first ? "" : "\n") + inspect::renderText(report, inColor);
         first = false;
-        if (!write(text)) {
+        output.write(text);
+        if (output.hasFailed()) {
             complain("cannot write to standard output");
             return EX_IOERR;
         }
@@ -73,7 +67,11 @@ int run(int argc, char** argv) {
         "Shows everything about an artefact that bears on its ticket: the code signature, where the "
         "ticket sits, what it says, and whether it is good. Changes nothing and uses no network.",
         "pinwell-inspect");
-    app.set_version_flag("--version", "pinwell-inspect " PINWELL_VERSION);
+    app.set_version_flag("--version", companion::versionText("pinwell-inspect"));
+    std::string color = "auto";
+    app.add_option("--color", color, "Colour the text: auto, always or never")
+        ->check(CLI::IsMember({"auto", "always", "never"}))
+        ->capture_default_str();
     app.add_option("PATH", arguments.paths, "A bundle, disk image or package, or a ticket file by itself")
         ->required();
     app.add_flag("--json", arguments.asJson, "Print one JSON object a path, each on a line");
@@ -85,9 +83,10 @@ int run(int argc, char** argv) {
     } catch (const CLI::Success& request) {
         return app.exit(request);  // help, version
     } catch (const CLI::ParseError& error) {
-        complain(foundation::escapeForTerminal(error.what()));
+        complain(companion::describe(app, error));
         return EX_USAGE;
     }
+    arguments.color = companion::colorWhenNamed(color);
     return inspectAll(arguments);
 }
 

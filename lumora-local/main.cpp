@@ -9,6 +9,8 @@
 #include <string>
 #include <vector>
 
+#include "companion/parse_errors.h"
+#include "companion/version.h"
 #include "foundation/format.h"
 #include "foundation/process.h"
 #include "lumora-local/commands.h"
@@ -315,7 +317,7 @@ int run(int argc, char** argv) {
     Arguments arguments;
     CLI::App app("A record service of one's own: issues tickets for artefacts and answers lookups for them.",
                  "lumora-local");
-    app.set_version_flag("--version", "lumora-local " PINWELL_VERSION);
+    app.set_version_flag("--version", companion::versionText("lumora-local"));
     declareCommands(app, arguments);
     try {
         app.parse(argc, argv);
@@ -323,7 +325,7 @@ int run(int argc, char** argv) {
     } catch (const CLI::Success& request) {
         return app.exit(request);  // help, version
     } catch (const CLI::ParseError& error) {
-        complain(foundation::escapeForTerminal(error.what()));
+        complain(companion::describe(app, error));
         return EX_USAGE;
     }
 }

@@ -89,7 +89,6 @@ std::vector<Option> fetchOptions(Settings& settings) {
 companion::Program programFor(Settings& settings) {
     return {
         .name = kProgramName,
-        .version = PINWELL_VERSION,
         .help =
             "Fetches tickets into files, and takes them from there to artefacts and back. Only fetch uses "
             "the\n"

@@ -110,6 +110,7 @@ TEST_F(Inspect, WrongUsageIsToldFromEverythingElse) {
     }
     EXPECT_THAT(inspect({"--help"}), Ended(0, Contains(HasSubstr("--json"))));
     EXPECT_THAT(inspect({"--version"}), Ended(0, Contains("pinwell-inspect 34.0")));
+    EXPECT_THAT(inspect({"--version"}), Ended(0, Contains("OpenSSL 3.")));
 }
 
 TEST_F(Inspect, AnOutputThatCannotBeWrittenIsAnError) {

@@ -63,6 +63,15 @@ TEST_F(CommandLine, RefusesWhatItDoesNotUnderstand) {
     EXPECT_FALSE(std::filesystem::exists(service_));
 }
 
+TEST_F(CommandLine, NamesTheNearestThatExists) {
+    EXPECT_EQ(runProgram({"isue", service_}).err,
+              "lumora-local: unknown command isue; did you mean issue?\n");
+    EXPECT_EQ(runProgram({"issue", service_, "a", "--asett"}).err,
+              "lumora-local: unknown option --asett; did you mean --asset?\n");
+    EXPECT_EQ(runProgram({"frobnicate"}).err, "lumora-local: unknown command frobnicate\n");
+    EXPECT_EQ(runProgram({"list", service_, "more"}).err, "lumora-local: unexpected argument more\n");
+}
+
 TEST_F(CommandLine, EscapesWhatItRepeats) {
     const Outcome outcome = runProgram({"init", service_, "--host", "a\x1b[31m\nb"});
     expectFailure(outcome, 64);

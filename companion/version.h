@@ -1,0 +1,13 @@
+// What the companions say of themselves.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+namespace pinwell::companion {
+
+/// "PROGRAM 34.0 (commit 0123456789ab, OpenSSL 3.0.17, curl 7.88.1)": the libraries are those that the
+/// process runs with. Without a line end.
+std::string versionText(std::string_view program);
+
+}  // namespace pinwell::companion
