@@ -1,5 +1,6 @@
 #include "fixture.h"
 
+#include <grp.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -30,12 +31,19 @@ void AsOrdinaryUser::give(const std::string& directory) {
 }
 
 void AsOrdinaryUser::dropRights() {
+    // A superuser's login is in the superuser's group besides, and what that group may do, an ordinary user
+    // may not.
+    const int count = getgroups(0, nullptr);
+    must(count >= 0, "counting the groups");
+    groups_.resize(static_cast<std::size_t>(count));
+    must(getgroups(count, groups_.data()) == count && setgroups(0, nullptr) == 0, "leaving the groups");
     must(setegid(kOrdinaryUser) == 0 && seteuid(kOrdinaryUser) == 0, "becoming an ordinary user");
     changed_ = true;
 }
 
 AsOrdinaryUser::~AsOrdinaryUser() {
-    if (changed_ && (seteuid(0) != 0 || setegid(0) != 0)) std::abort();
+    if (changed_ && (seteuid(0) != 0 || setegid(0) != 0 || setgroups(groups_.size(), groups_.data()) != 0))
+        std::abort();
 }
 
 std::size_t openFileCount() {

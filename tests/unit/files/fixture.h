@@ -4,6 +4,7 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sys/types.h>
 
 #include <memory>
 #include <string>
@@ -38,6 +39,7 @@ class AsOrdinaryUser {
     void dropRights();
 
     bool changed_ = false;
+    std::vector<gid_t> groups_;
 };
 
 /// Numbers of open files of the process.
