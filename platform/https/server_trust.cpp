@@ -62,12 +62,17 @@ int verifyThunk(X509_STORE_CTX* context, void* self) {
     return static_cast<ServerTrust*>(self)->verify(context) ? 1 : 0;
 }
 
-// Alerts are two bytes, level and description (RFC 8446, section 6).
+// Sees records' heads and alerts (RFC 8446, sections 5.1 and 6). A head ends with the record's length; an
+// alert is two bytes, level and description.
 void messageThunk(int isWritten, int, int contentType, const void* bytes, std::size_t length, SSL*,
                   void* self) {
-    if (isWritten != 0 || contentType != SSL3_RT_ALERT || length != 2) return;
-    if (static_cast<const unsigned char*>(bytes)[1] == SSL_AD_CLOSE_NOTIFY)
-        static_cast<ServerTrust*>(self)->noteOrderlyEnd();
+    if (isWritten != 0) return;
+    auto& trust = *static_cast<ServerTrust*>(self);
+    const auto* const octets = static_cast<const unsigned char*>(bytes);
+    if (contentType == SSL3_RT_HEADER && length == SSL3_RT_HEADER_LENGTH)
+        trust.noteRecord(length + (std::size_t{octets[3]} << 8U) + octets[4]);
+    if (contentType == SSL3_RT_ALERT && length == 2 && octets[1] == SSL_AD_CLOSE_NOTIFY)
+        trust.noteOrderlyEnd();
 }
 
 }  // namespace
@@ -95,6 +100,7 @@ bool ServerTrust::verify(void* storeContext) noexcept {
         trusted = false;  // the caller is C
     }
     asked_ = true;
+    bytesArrived_ = 0;
     refused_ = refused_ || !trusted;
     X509_STORE_CTX_set_error(context, trusted ? X509_V_OK : X509_V_ERR_APPLICATION_VERIFICATION);
     return trusted;

@@ -37,6 +37,10 @@ class ServerTrust {
     bool sawOrderlyEnd() const noexcept { return sawOrderlyEnd_; }
     void noteOrderlyEnd() noexcept { sawOrderlyEnd_ = true; }
 
+    /// How many bytes of TLS records have come since the judge was asked.
+    std::size_t bytesArrived() const noexcept { return bytesArrived_; }
+    void noteRecord(std::size_t length) noexcept { bytesArrived_ += length; }
+
     /// The last handshake agreed on HTTP/2 (ALPN, RFC 7301).
     bool agreedOnHTTP2() const noexcept { return agreedOnHTTP2_; }
 
@@ -49,6 +53,7 @@ class ServerTrust {
     bool refused_ = false;
     bool sawOrderlyEnd_ = false;
     bool agreedOnHTTP2_ = false;
+    std::size_t bytesArrived_ = 0;
 };
 
 }  // namespace pinwell::https

@@ -17,6 +17,11 @@ struct SessionOptions {
     std::size_t maximumHeaderBytes =
         128UL * 1024;                       // of one exchange: interim responses and trailers included
     std::size_t maximumHeaderFields = 256;  // the same
+
+    /// How much the server may send, as it is on the wire, before a line of a head or a piece of a body comes
+    /// of it. What the transfer library keeps meanwhile is in proportion.
+    std::size_t maximumSilentBytes = 256UL * 1024;
+
     int maximumRedirects = kMaximumRedirects;
 
     /// How long nothing may arrive, or be sent. Name lookup, connection and handshake up to the server's

@@ -12,6 +12,9 @@ using Code = URLErrorCode;
 
 constexpr TransferFailure kUnknown{CURLE_OK, Code::unknown, "the transfer failed"};
 
+// CURLE_TOO_LARGE, which headers before 8.6 do not have.
+constexpr int kTooLarge = 100;
+
 // Results that cannot come from an https exchange as we make it are left to kUnknown.
 constexpr std::array kFailures{
     // Of the answer: the URL's scheme has been looked at before.
@@ -44,9 +47,9 @@ constexpr std::array kFailures{
     TransferFailure{CURLE_PARTIAL_FILE, Code::connectionLost, "the connection was closed within the answer"},
     TransferFailure{CURLE_SEND_ERROR, Code::connectionLost, "the connection was lost while sending"},
     TransferFailure{CURLE_RECV_ERROR, Code::connectionLost, "the connection was lost while receiving"},
-    TransferFailure{CURLE_FILESIZE_EXCEEDED, Code::tooLarge, "the answer is larger than allowed"},
-    // What the library says to a header line that is longer than its own limit.
+    // What the library says to a header line that is longer than its own limit, before and since 8.6.
     TransferFailure{CURLE_OUT_OF_MEMORY, Code::tooLarge, "the answer is larger than can be kept"},
+    TransferFailure{kTooLarge, Code::tooLarge, "the answer is larger than can be kept"},
 };
 
 }  // namespace

@@ -63,6 +63,13 @@ TEST_F(DataTask, MakesAHeadRequestWithoutWaitingForABody) {
     EXPECT_EQ(fetch(request).text(), "");
 }
 
+TEST_F(DataTask, MakesAHeadRequestForWhatIsLargerThanAllowed) {
+    server.enqueue(Script().readRequest().send("HTTP/1.1 200 OK\r\nContent-Length: 99999999999\r\n\r\n"));
+    https::Request request = get(server.url());
+    request.method = "HEAD";
+    EXPECT_EQ(fetch(request).text(), "");
+}
+
 TEST_F(DataTask, DeliversAnEmptyBody) {
     const Outcome outcome = fetchFrom(Script().respond({}));
     EXPECT_FALSE(outcome.error);

@@ -30,6 +30,11 @@ TEST_F(Framing, TheSameContentLengthTwiceIsOne) {
     EXPECT_EQ(fetchAnswer("Content-Length: 4\r\nContent-Length: 4\r\n", "body").text(), "body");
 }
 
+TEST_F(Framing, TheSameContentLengthTwiceInOneFieldIsOneOrRefused) {
+    const Outcome outcome = fetchAnswer("Content-Length: 4, 4\r\n", "body");
+    EXPECT_TRUE(outcome.error || outcome.text() == "body");
+}
+
 TEST_F(Framing, ContentLengthsThatDifferAreRefused) {
     for (const char* fields :
          {"Content-Length: 4\r\nContent-Length: 9\r\n", "Content-Length: 9\r\nContent-Length: 4\r\n",
@@ -47,6 +52,32 @@ TEST_F(Framing, ABrokenContentLengthIsNoWayToPassOffACutBody) {
     expectRefused(
         fetchFrom(Script().readRequest().send("HTTP/1.1 200 OK\r\nContent-Length: -1\r\n\r\nbo").cut()),
         "cut");
+}
+
+// To one reader a length and to another an unknown field, it would make a cut body a whole one.
+TEST_F(Framing, ASpaceBeforeTheColonIsRefused) {
+    for (const char* field :
+         {"Content-Length : 9\r\n", "Content-Length\t: 9\r\n", "Transfer-Encoding : chunked\r\n"})
+        expectRefused(fetchFrom(Script()
+                                    .readRequest()
+                                    .send("HTTP/1.1 200 OK\r\n" + std::string(field) + "\r\n2\r\nbo")
+                                    .cut()),
+                      field);
+}
+
+TEST_F(Framing, AFoldedFieldThatSaysWhereTheBodyEndsIsRefused) {
+    for (const char* field : {"Content-Length:\r\n 9\r\n", "Transfer-Encoding:\r\n\tchunked\r\n"})
+        expectRefused(fetchFrom(Script()
+                                    .readRequest()
+                                    .send("HTTP/1.1 200 OK\r\n" + std::string(field) + "\r\n2\r\nbo")
+                                    .cut()),
+                      field);
+}
+
+TEST_F(Framing, AFoldedFieldOfAnotherNameIsUnfolded) {
+    const Outcome outcome = fetchAnswer("X-A: b\r\n  c\r\nContent-Length: 4\r\n", "body");
+    EXPECT_EQ(outcome.text(), "body");
+    EXPECT_EQ(outcome.response->header("X-A"), "b c");
 }
 
 // RFC 9112, section 6.3: the coding goes before the length.
@@ -111,16 +142,11 @@ TEST_F(Framing, ChunkExtensionsArePassedOver) {
 }
 
 TEST_F(Framing, AChunkExtensionWithoutEndIsNoAnswer) {
-    Gate begun;
-    server.enqueue(Script()
-                       .readRequest()
-                       .send("HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n4;")
-                       .waitFor(begun)
-                       .sendEndlessly(std::string(16384, 'x')));
-    auto outcome = start(get(server.url()));
-    ASSERT_TRUE(begun.waitUntilReached());
-    begun.open();
-    expectFailure(outlast(std::move(outcome)), URLErrorCode::timedOut, "no answer for 60 seconds");
+    expectFailure(fetchFrom(Script()
+                                .readRequest()
+                                .send("HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n4;")
+                                .sendEndlessly(std::string(16384, 'x'))),
+                  URLErrorCode::badServerResponse, "much that is no part of an answer");
 }
 
 TEST_F(Framing, TrailersCannotChangeTheHead) {
@@ -164,8 +190,7 @@ TEST_F(Framing, AFieldThatLooksLikeAStatusLineHidesNothing) {
     expectRefused(fetchAnswer("Transfer-Encoding: gzip\r\n" + std::string(disguise), gzipOfBody()), "gzip");
     expectRefused(fetchAnswer("Content-Length: 9\r\nContent-Length: 4\r\n" + std::string(disguise), "body"),
                   "lengths");
-    const Outcome outcome = fetchAnswer("X-A: b\r\n" + std::string(disguise), "body");
-    EXPECT_EQ(outcome.response->header("X-A"), "b");
+    expectRefused(fetchAnswer("X-A: b\r\n" + std::string(disguise), "body"), "by itself");
 }
 
 TEST_F(Framing, AProtocolThatNobodyAskedToSwitchToIsNoAnswer) {

@@ -128,7 +128,39 @@ TEST_F(HostileAnswer, ABodyOfTheGreatestSizeAllowed) {
 TEST_F(HostileAnswer, ABodyThatAnnouncesTooMuch) {
     options.maximumResponseBody = 1000;
     expectFailure(fetchFrom(Script().respond({.body = std::string(1001, 'x')})), URLErrorCode::tooLarge,
-                  "larger than");
+                  "larger than the 1000 bytes allowed");
+}
+
+TEST_F(HostileAnswer, ABodyThatAnnouncesMoreThanANumberHolds) {
+    for (const char* length :
+         {"9223372036854775808", "18446744073709551616", "99999999999999999999999999999999"})
+        expectFailure(
+            fetchFrom(Script()
+                          .readRequest()
+                          .send("HTTP/1.1 200 OK\r\nContent-Length: " + std::string(length) + "\r\n\r\nbody")
+                          .close()),
+            URLErrorCode::tooLarge, "larger than the 67108864 bytes allowed");
+}
+
+TEST_F(HostileAnswer, AnEndlessBodyOneByteTooLong) {
+    options.maximumResponseBody = 1000;
+    const auto endedByConnection = [](std::size_t size) {
+        return Script().readRequest().send("HTTP/1.0 200 OK\r\n\r\n" + std::string(size, 'x')).close();
+    };
+    EXPECT_EQ(fetchFrom(endedByConnection(1000)).text().size(), 1000U);
+    expectFailure(fetchFrom(endedByConnection(1001)), URLErrorCode::tooLarge,
+                  "larger than the 1000 bytes allowed");
+}
+
+TEST_F(HostileAnswer, AChunkedBodyOneByteTooLong) {
+    options.maximumResponseBody = 16;
+    const auto chunks = [](const std::string& last) {
+        return Script().readRequest().send("HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n" + last +
+                                           "0\r\n\r\n");
+    };
+    EXPECT_EQ(fetchFrom(chunks("8\r\n12345678\r\n8\r\n12345678\r\n")).text().size(), 16U);
+    expectFailure(fetchFrom(chunks("8\r\n12345678\r\n9\r\n123456789\r\n")), URLErrorCode::tooLarge,
+                  "larger than the 16 bytes allowed");
 }
 
 TEST_F(HostileAnswer, AChunkedBodyThatGrowsTooLarge) {
@@ -165,6 +197,31 @@ TEST_F(HostileAnswer, AnEndlessHeaderLine) {
     expectFailure(
         fetchFrom(Script().readRequest().send("HTTP/1.1 200 OK\r\nX-A: ").sendEndlessly("bbbbbbbbbbbbbbbb")),
         URLErrorCode::tooLarge, "larger than");
+}
+
+// The transfer library has a limit of its own for a line, which is larger.
+TEST_F(HostileAnswer, AnEndlessHeaderLineUnderOurOwnLimit) {
+    options.maximumSilentBytes = 10000;
+    expectFailure(fetchFrom(Script()
+                                .readRequest()
+                                .send("HTTP/1.1 200 OK\r\nX-A: ")
+                                .send(std::string(10000, 'b'))
+                                .waitFor(gate)),
+                  URLErrorCode::badServerResponse, "much that is no part of an answer");
+}
+
+TEST_F(HostileAnswer, AnEndlessTrailerLine) {
+    expectFailureOf(fetchFrom(Script()
+                                  .readRequest()
+                                  .send("HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n0\r\nX-A: ")
+                                  .sendEndlessly(std::string(4096, 'b'))),
+                    {URLErrorCode::badServerResponse, URLErrorCode::tooLarge, URLErrorCode::connectionLost});
+}
+
+TEST_F(HostileAnswer, ALargeBodyThatComesInManyPiecesIsNoSilence) {
+    options.maximumSilentBytes = 40000;
+    const std::string body(std::size_t{1} << 20U, 'x');
+    EXPECT_EQ(fetchFrom(Script().respond({.body = body})).text(), body);
 }
 
 TEST_F(HostileAnswer, EndlessInterimAnswers) {
