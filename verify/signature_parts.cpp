@@ -209,10 +209,13 @@ void checkSigner(const SignatureParts& parts, const std::string& place, Section&
         } else {
             section.fail(kSigner, place, kWanted, "no signer, and not ad hoc");
         }
-    } else if (codesign::verifyDetachedCms(parts.cms(), parts.directories().front().content.bytes())) {
+        return;
+    }
+    try {
+        codesign::requireDetachedCms(parts.cms(), parts.directories().front().content.bytes());
         section.pass(kSigner, place, "a signature that verifies");
-    } else {
-        section.fail(kSigner, place, kWanted, "the signer's signature does not verify");
+    } catch (const codesign::CodeError& error) {
+        section.fail(kSigner, place, kWanted, error.what());
     }
 }
 

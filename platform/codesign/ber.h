@@ -13,6 +13,7 @@
 // inside each other, each of which is such a pass, end at a limit.
 #pragma once
 
+#include <algorithm>
 #include <cstdint>
 #include <optional>
 
@@ -22,6 +23,10 @@ namespace pinwell::codesign::ber {
 
 using foundation::ByteView;
 using foundation::Data;
+
+inline bool isEqual(ByteView a, ByteView b) {
+    return std::ranges::equal(a, b);
+}
 
 /// First bytes of elements: class, constructed bit and a number below 31.
 inline constexpr std::uint8_t kInteger = 0x02;

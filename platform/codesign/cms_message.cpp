@@ -23,10 +23,6 @@ constexpr const char* kMessage = "the signer's message";
 constexpr const char* kSigner = "the signer in the message";
 constexpr const char* kCertificate = "a certificate in the message";
 
-bool isType(ByteView a, ByteView b) {
-    return std::ranges::equal(a, b);
-}
-
 void requireVersion(Reader& reader, std::initializer_list<int> known, const char* what) {
     const ByteView version = reader.expect(ber::kInteger, what).contents;
     const bool isKnown =
@@ -51,7 +47,7 @@ std::optional<Data> readKeyIdentifier(const Element& extensions, Work& work) {
     while (!list.atEnd()) {
         Reader extension = within(list, ber::kSequence, work, kCertificate);
         const ByteView type = extension.expect(ber::kObjectIdentifier, kCertificate).contents;
-        if (!isType(type, asBytes(kKeyIdentifierExtension))) continue;
+        if (!ber::isEqual(type, asBytes(kKeyIdentifierExtension))) continue;
         Element value = extension.next(kCertificate);
         if (value.tag != ber::kOctetString) value = extension.expect(ber::kOctetString, kCertificate);
         Reader inner(value.contents, work);
@@ -167,7 +163,7 @@ SignedMessage parseSignedMessage(ByteView bytes) {
     Reader info = within(whole, ber::kSequence, work, kMessage);
     whole.finish(kMessage);
     const ByteView type = info.expect(ber::kObjectIdentifier, kMessage).contents;
-    if (!isType(type, asBytes(kSignedDataType))) refuse("the signer's message is no SignedData");
+    if (!ber::isEqual(type, asBytes(kSignedDataType))) refuse("the signer's message is no SignedData");
     Reader wrapper = within(info, ber::context(0), work, kMessage);
     info.finish(kMessage);
     Reader fields = within(wrapper, ber::kSequence, work, kMessage);
@@ -195,7 +191,7 @@ std::optional<Element> soleValueOf(const Element& attributes, ByteView type, con
     std::size_t matches = 0;
     for (Reader list(attributes.contents, work); !list.atEnd();) {
         Reader fields = within(list, ber::kSequence, work, what);
-        const bool isWanted = isType(fields.expect(ber::kObjectIdentifier, what).contents, type);
+        const bool isWanted = ber::isEqual(fields.expect(ber::kObjectIdentifier, what).contents, type);
         if (isWanted) ++matches;
         for (Reader set = within(fields, ber::kSet, work, what); !set.atEnd();) {
             const Element value = set.next(what);

@@ -38,10 +38,6 @@ constexpr std::string_view kTimeStampTokenAttribute =
 /// Longest name that is compared otherwise than byte by byte. Those in certificates take some 100 bytes.
 constexpr std::size_t kMaximumNameSize = 4096;
 
-bool isEqual(ByteView a, ByteView b) {
-    return std::ranges::equal(a, b);
-}
-
 Name parseName(ByteView bytes) {
     const unsigned char* cursor = unsignedBytes(bytes);
     return Name(d2i_X509_NAME(nullptr, &cursor, static_cast<long>(bytes.size())));
@@ -49,7 +45,7 @@ Name parseName(ByteView bytes) {
 
 // A name may be written with other string types in the message than in the certificate.
 bool isSameName(ByteView a, ByteView b) {
-    if (isEqual(a, b)) return true;
+    if (ber::isEqual(a, b)) return true;
     if (a.size() > kMaximumNameSize || b.size() > kMaximumNameSize) return false;
     const Name first = parseName(a);
     const Name second = parseName(b);
@@ -66,7 +62,7 @@ ByteView shortestNumber(ByteView number) {
 
 bool isOf(const MessageCertificate& certificate, const MessageSigner& signer) {
     if (signer.keyIdentifier) return certificate.keyIdentifier == signer.keyIdentifier;
-    return isEqual(shortestNumber(certificate.serialNumber), shortestNumber(signer.serialNumber)) &&
+    return ber::isEqual(shortestNumber(certificate.serialNumber), shortestNumber(signer.serialNumber)) &&
            isSameName(certificate.issuer, signer.issuer);
 }
 
@@ -82,7 +78,7 @@ Data signedBytes(const SignedMessage& message, ByteView content) {
     const MessageSigner& signer = message.signer;
     const ber::Element& attributes = *signer.signedAttributes;
     const auto type = soleValueOf(attributes, asBytes(kContentTypeAttribute), kSignedAttributes);
-    if (!type || type->tag != ber::kObjectIdentifier || !isEqual(type->contents, message.contentType))
+    if (!type || type->tag != ber::kObjectIdentifier || !ber::isEqual(type->contents, message.contentType))
         refuse("the signed attributes have not the content's type");
     const auto digest = soleValueOf(attributes, asBytes(kMessageDigestAttribute), kSignedAttributes);
     const auto computed = messageDigest(signer.digestAlgorithm, content);
@@ -99,11 +95,11 @@ Data signedBytes(const SignedMessage& message, ByteView content) {
 void requireSignedBySigner(const SignedMessage& message, ByteView content) {
     const MessageSigner& signer = message.signer;
     const auto isSigners = [&](const Algorithm& listed) {
-        return isEqual(listed.identifier, signer.digestAlgorithm.identifier);
+        return ber::isEqual(listed.identifier, signer.digestAlgorithm.identifier);
     };
     if (std::ranges::none_of(message.digestAlgorithms, isSigners))
         refuse("the message does not list the signer's digest algorithm");
-    if (!signer.signedAttributes && !isEqual(message.contentType, asBytes(kPlainData)))
+    if (!signer.signedAttributes && !ber::isEqual(message.contentType, asBytes(kPlainData)))
         refuse("the message has no signed attributes");
     const MessageCertificate& certificate = certificateOfSigner(message);
     const Data attributes = signer.signedAttributes ? signedBytes(message, content) : Data();
@@ -114,7 +110,7 @@ void requireSignedBySigner(const SignedMessage& message, ByteView content) {
 /// The content of a time-stamp token whose own signature verifies.
 Data requireToken(ByteView bytes) {
     SignedMessage token = parseSignedMessage(bytes);
-    if (!token.content || !isEqual(token.contentType, asBytes(kTimeStampContent)))
+    if (!token.content || !ber::isEqual(token.contentType, asBytes(kTimeStampContent)))
         refuse("the time-stamp token holds no time stamp");
     requireSignedBySigner(token, *token.content);
     return *std::move(token.content);
@@ -141,7 +137,7 @@ std::optional<Date> secureTimestamp(ByteView cms) {
         const Data content = requireToken(token->whole);
         const TimeStamp stamp = parseTimeStamp(content);
         const auto imprint = messageDigest(stamp.imprintAlgorithm, message.signer.signature);
-        if (!imprint || !isEqual(*imprint, stamp.imprint)) return std::nullopt;
+        if (!imprint || !ber::isEqual(*imprint, stamp.imprint)) return std::nullopt;
         return stamp.time;
     } catch (const CodeError&) {
         return std::nullopt;

@@ -16,16 +16,6 @@ namespace {
 constexpr std::uint32_t kCoveredSlots[] = {kSlotRequirements, kSlotEntitlements, kSlotTrailer,
                                            kSlotDerEntitlements};
 
-bool isAlternate(std::uint32_t slot) {
-    return slot >= kSlotFirstAlternate && slot <= kSlotLastAlternate;
-}
-
-bool isWanted(std::uint32_t slot) {
-    // Not the trailer's slot: that component is the file's own trailer, not something the superblob carries.
-    return slot == kSlotCodeDirectory || slot == kSlotRequirements || slot == kSlotEntitlements ||
-           slot == kSlotDerEntitlements || isAlternate(slot);
-}
-
 Data unwrapCms(const Blob& blob) {
     if (blob.magic != kWrapperMagic) refuse("the CMS blob has a wrong magic");
     return foundation::toData(blob.bytes.subspan(kBlobHeaderSize));
@@ -40,7 +30,7 @@ SignatureComponents componentsOfSuperBlob(ByteView superblob) {
         if (blob.magic == kCodeDirectoryMagic) ++directories;
         if (blob.slot == kSlotCms) {
             components.cms = unwrapCms(blob);
-        } else if (isWanted(blob.slot)) {
+        } else if (isSlotOfSignature(blob.slot)) {
             components.blobs.emplace(blob.slot, foundation::toData(blob.bytes));
         }
     }
@@ -51,11 +41,11 @@ SignatureComponents componentsOfSuperBlob(ByteView superblob) {
 std::optional<CodeSignature> CodeSignature::parse(SignatureComponents components) {
     std::vector<CodeDirectory> directories;
     for (const auto& [slot, blob] : components.blobs) {
-        if (slot != kSlotCodeDirectory && !isAlternate(slot)) continue;
+        if (slot != kSlotCodeDirectory && !isAlternateSlot(slot)) continue;
         const bool known = digestTypeNumbered(CodeDirectory::digestTypeNumberOf(blob)).has_value();
-        if (isAlternate(slot) && directories.empty())
+        if (isAlternateSlot(slot) && directories.empty())
             refuse("alternate code directories without a primary one");
-        if (isAlternate(slot) && !known) continue;
+        if (isAlternateSlot(slot) && !known) continue;
         CodeDirectory directory = CodeDirectory::parse(blob);
         const auto sameType = [&directory](const CodeDirectory& other) {
             return other.digestType() == directory.digestType();

@@ -64,7 +64,7 @@ constexpr std::array kDigests = {
 };
 
 bool is(ByteView identifier, std::string_view known) {
-    return std::ranges::equal(identifier, asBytes(known));
+    return ber::isEqual(identifier, asBytes(known));
 }
 
 /// The last number of an identifier that is directly below `arc`; 0 if it is not.

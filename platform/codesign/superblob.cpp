@@ -27,7 +27,8 @@ std::uint32_t readMagicAndLength(ByteReader& reader) {
 
 void requireDistinctSlots(const std::vector<Blob>& blobs) {
     std::vector<std::uint32_t> slots;
-    for (const Blob& blob : blobs) slots.push_back(blob.slot);
+    for (const Blob& blob : blobs)
+        if (isSlotOfSignature(blob.slot)) slots.push_back(blob.slot);
     std::sort(slots.begin(), slots.end());
     if (std::adjacent_find(slots.begin(), slots.end()) != slots.end()) refuse("two entries for one slot");
 }
@@ -40,6 +41,15 @@ void requireSeparate(std::vector<Range> ranges) {
 }
 
 }  // namespace
+
+bool isAlternateSlot(std::uint32_t slot) {
+    return slot >= kSlotFirstAlternate && slot <= kSlotLastAlternate;
+}
+
+bool isSlotOfSignature(std::uint32_t slot) {
+    return slot == kSlotCodeDirectory || slot == kSlotRequirements || slot == kSlotEntitlements ||
+           slot == kSlotDerEntitlements || slot == kSlotCms || isAlternateSlot(slot);
+}
 
 std::vector<Blob> parseSuperBlob(ByteView superblob) {
     ByteReader header(superblob);

@@ -12,8 +12,9 @@
 // The index may name the blobs in any order, and gaps may lie between them. What follows the superblob's own
 // length in the area set aside for it is padding and is never looked at.
 //
-// Refused: a wrong magic, a length or count that does not fit, two entries for one slot, blobs that overlap
-// each other or the index, and whatever exceeds the limits in code_signing.h.
+// Refused: a wrong magic, a length or count that does not fit, two entries for a slot of the signature, blobs
+// that overlap each other or the index, and whatever exceeds the limits in code_signing.h. Other slots, that
+// of the ticket for one, may have any number of entries.
 #pragma once
 
 #include <cstdint>
@@ -42,6 +43,13 @@ inline constexpr std::uint32_t kSlotDerEntitlements = 7;
 inline constexpr std::uint32_t kSlotFirstAlternate = 0x1000;
 inline constexpr std::uint32_t kSlotLastAlternate = 0x1004;
 inline constexpr std::uint32_t kSlotCms = 0x10000;
+
+/// Whether it is the slot of an alternate code directory.
+bool isAlternateSlot(std::uint32_t slot);
+
+/// Whether the signature is read from this slot: code directories, the components that they cover, and the
+/// signer's message.
+bool isSlotOfSignature(std::uint32_t slot);
 
 /// One blob of a superblob.
 struct Blob {

@@ -76,10 +76,10 @@ std::uint64_t superblobSize(const I& i) {
 std::vector<ImageFault> imageFaults() {
     return {
         {"NoTicket", "no ticket is stapled to it", kRefused, [](const I&) { return imageOf(DiskImageBuilder::signature()).build(); }},
-        {"TwoTicketsTheEarlierForged", "two tickets: a slot that is listed twice makes the signature invalid, and another hash is made up", kRefused, [](const I& i) { return imageOf(DiskImageBuilder::signature().blob(kSampleTicketSlot, ticketBlob(forgedTicket())).blob(kSampleTicketSlot, blobOf(i))).build(); }},
+        {"TwoTicketsTheEarlierForged", "nothing: of two tickets the later one counts, and it is good", kAccepted, [](const I& i) { return imageOf(DiskImageBuilder::signature().blob(kSampleTicketSlot, ticketBlob(forgedTicket())).blob(kSampleTicketSlot, blobOf(i))).build(); }},
         {"TicketInAnotherSlot", "the ticket stands in another slot", kRefused, [](const I& i) { return imageOf(DiskImageBuilder::signature().blob(0x10003, blobOf(i))).build(); }},
         {"TicketOfAnotherMagic", "nothing: the slot says what the blob is, its magic is not looked at", kAccepted, [](const I& i) { return imageOf(DiskImageBuilder::signature().blob(kSampleTicketSlot, makeBlob(0xFADE0C01, foundation::asBytes(imageTicket(i))))).build(); }},
-        {"TwoTicketsTheLaterForged", "two tickets, the later one another artefact's: a slot twice makes the signature invalid", kRefused, [](const I& i) { return imageOf(stapled(i).blob(kSampleTicketSlot, ticketBlob(forgedTicket()))).build(); }},
+        {"TwoTicketsTheLaterForged", "two tickets, and the later one counts: it is another signer's", kRefused, [](const I& i) { return imageOf(stapled(i).blob(kSampleTicketSlot, ticketBlob(forgedTicket()))).build(); }},
         {"TicketEmpty", "a ticket of no byte", kRefused, [](const I&) { return imageOf(DiskImageBuilder::signature().blob(kSampleTicketSlot, ticketBlob(""))).build(); }},
         {"TicketShared", "two index entries, one blob", kUnusable, [](const I& i) { return imageOf(stapled(i).blob(0x10003, makeBlob(0xFADE0B01, {})).offsetOf(0x10003, ticketOffset(i) + 8)).build(); }},
         {"TicketOverTheDirectory", "the ticket's entry leads to the code directory", kUnusable, [](const I& i) { return imageOf(stapled(i).offsetOf(kSampleTicketSlot, 12 + 4 * 8)).build(); }},

@@ -4,14 +4,11 @@
 
 #include <algorithm>
 
+#include "cms_fixture.h"
 #include "codesign/cms_message.h"
 #include "codesign/cms_signature.h"
 #include "codesign/code_error.h"
 #include "codesign/signer_key.h"
-#include "foundation/byte_writer.h"
-#include "support/cms_parts.h"
-#include "support/cms_signer.h"
-#include "support/ticket_builder.h"
 
 namespace pinwell::test {
 namespace {
@@ -20,12 +17,9 @@ using codesign::kMaximumCertificates;
 using codesign::kMaximumDigestAlgorithms;
 using codesign::kMaximumRsaBits;
 
-const Data kContent = foundation::toData("a code directory");
-
 constexpr std::string_view kContentType = "\x2A\x86\x48\x86\xF7\x0D\x01\x09\x03";
 constexpr std::string_view kMessageDigest = "\x2A\x86\x48\x86\xF7\x0D\x01\x09\x04";
 constexpr std::string_view kPlainData = "\x2A\x86\x48\x86\xF7\x0D\x01\x07\x01";
-constexpr std::string_view kTimeStampContent = "\x2A\x86\x48\x86\xF7\x0D\x01\x09\x10\x01\x04";
 
 /// Why the message is refused; empty if it is not.
 std::string refusalOf(ByteView message, ByteView content = kContent) {
@@ -41,23 +35,10 @@ std::string refusalOf(const CmsParts& parts) {
     return refusalOf(parts.build());
 }
 
-CmsParts goodParts() {
-    return CmsParts::of(CmsBuilder(kContent).build());
-}
 CmsParts with(const std::function<void(CmsParts&)>& change) {
     CmsParts parts = goodParts();
     change(parts);
     return parts;
-}
-CmsSignerParts& signerOf(CmsParts& parts) {
-    return parts.signers.front();
-}
-
-Data identifier(std::string_view contents) {
-    return derElement(0x06, foundation::asBytes(contents));
-}
-Data number(int value) {
-    return derElement(0x02, Data{static_cast<std::byte>(value)});
 }
 
 TEST(CmsMessage, VerifiesAsItWasTakenApart) {

@@ -2,8 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include "cms_fixture.h"
 #include "codesign/code_error.h"
-#include "support/cms_signer.h"
 
 namespace pinwell::test {
 namespace {
@@ -11,7 +11,6 @@ namespace {
 using codesign::secureTimestamp;
 using foundation::Date;
 
-const Data kSignedContent = foundation::toData("a code directory");
 constexpr Date kStampedAt{1795204500};
 
 bool verifyDetachedCms(ByteView cms, ByteView content) {
@@ -25,98 +24,94 @@ bool verifyDetachedCms(ByteView cms, ByteView content) {
 }
 
 TEST(CmsSignature, VerifiesOverItsContent) {
-    EXPECT_TRUE(verifyDetachedCms(CmsBuilder(kSignedContent).key(TestKey::ecP256).build(), kSignedContent));
-    EXPECT_TRUE(verifyDetachedCms(CmsBuilder(kSignedContent).key(TestKey::rsa2048).build(), kSignedContent));
+    EXPECT_TRUE(verifyDetachedCms(CmsBuilder(kContent).key(TestKey::ecP256).build(), kContent));
+    EXPECT_TRUE(verifyDetachedCms(CmsBuilder(kContent).key(TestKey::rsa2048).build(), kContent));
 }
 
 TEST(CmsSignature, VerifiesInBerWithIndefiniteLengths) {
-    const Data ber = CmsBuilder(kSignedContent).ber().build();
+    const Data ber = CmsBuilder(kContent).ber().build();
     ASSERT_EQ(ber[1], std::byte{0x80});
-    EXPECT_TRUE(verifyDetachedCms(ber, kSignedContent));
+    EXPECT_TRUE(verifyDetachedCms(ber, kContent));
 }
 
 TEST(CmsSignature, VerifiesWithoutSignedAttributes) {
-    EXPECT_TRUE(
-        verifyDetachedCms(CmsBuilder(kSignedContent).withoutSignedAttributes().build(), kSignedContent));
+    EXPECT_TRUE(verifyDetachedCms(CmsBuilder(kContent).withoutSignedAttributes().build(), kContent));
 }
 
 TEST(CmsSignature, RefusesOtherContent) {
     const Data other = foundation::toData("another directory");
-    EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kSignedContent).build(), other));
-    EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kSignedContent).withoutSignedAttributes().build(), other));
-    EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kSignedContent).ber().build(), other));
+    EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kContent).build(), other));
+    EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kContent).withoutSignedAttributes().build(), other));
+    EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kContent).ber().build(), other));
 }
 
 TEST(CmsSignature, RefusesABrokenSignature) {
-    EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kSignedContent).brokenSignature().build(), kSignedContent));
-    EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kSignedContent).key(TestKey::rsa2048).brokenSignature().build(),
-                                   kSignedContent));
+    EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kContent).brokenSignature().build(), kContent));
+    EXPECT_FALSE(
+        verifyDetachedCms(CmsBuilder(kContent).key(TestKey::rsa2048).brokenSignature().build(), kContent));
 }
 
 TEST(CmsSignature, RefusesAMessageWithoutTheSignersCertificate) {
-    EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kSignedContent).withoutCertificate().build(), kSignedContent));
+    EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kContent).withoutCertificate().build(), kContent));
 }
 
 TEST(CmsSignature, RefusesAMessageThatCarriesItsContent) {
-    EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kSignedContent).attached().build(), kSignedContent));
+    EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kContent).attached().build(), kContent));
 }
 
 TEST(CmsSignature, RefusesWhatIsNoSignedData) {
-    EXPECT_FALSE(verifyDetachedCms({}, kSignedContent));
-    EXPECT_FALSE(verifyDetachedCms(Data(100), kSignedContent));
-    EXPECT_FALSE(verifyDetachedCms(foundation::toData("0\x80"), kSignedContent));
+    EXPECT_FALSE(verifyDetachedCms({}, kContent));
+    EXPECT_FALSE(verifyDetachedCms(Data(100), kContent));
+    EXPECT_FALSE(verifyDetachedCms(foundation::toData("0\x80"), kContent));
     // A ContentInfo of plain data: SEQUENCE { 1.2.840.113549.1.7.1, [0] { OCTET STRING "" } }
     const unsigned char data[] = {0x30, 0x0F, 0x06, 0x09, 0x2A, 0x86, 0x48, 0x86, 0xF7,
                                   0x0D, 0x01, 0x07, 0x01, 0xA0, 0x02, 0x04, 0x00};
-    EXPECT_FALSE(verifyDetachedCms(std::as_bytes(std::span(data)), kSignedContent));
+    EXPECT_FALSE(verifyDetachedCms(std::as_bytes(std::span(data)), kContent));
 }
 
 TEST(CmsSignature, RefusesBytesBehindTheMessage) {
-    Data cms = CmsBuilder(kSignedContent).build();
+    Data cms = CmsBuilder(kContent).build();
     cms.push_back(std::byte{0});
-    EXPECT_FALSE(verifyDetachedCms(cms, kSignedContent));
+    EXPECT_FALSE(verifyDetachedCms(cms, kContent));
 }
 
 TEST(CmsSignature, EndsCleanlyWhereverItIsCut) {
-    for (const Data& whole : {CmsBuilder(kSignedContent).timestamp(TimestampBuilder()).build(),
-                              CmsBuilder(kSignedContent).ber().timestamp(TimestampBuilder()).build()}) {
-        ASSERT_TRUE(verifyDetachedCms(whole, kSignedContent));
+    for (const Data& whole : {CmsBuilder(kContent).timestamp(TimestampBuilder()).build(),
+                              CmsBuilder(kContent).ber().timestamp(TimestampBuilder()).build()}) {
+        ASSERT_TRUE(verifyDetachedCms(whole, kContent));
         for (std::size_t length = 0; length < whole.size(); ++length) {
-            EXPECT_FALSE(verifyDetachedCms(ByteView(whole).first(length), kSignedContent)) << length;
+            EXPECT_FALSE(verifyDetachedCms(ByteView(whole).first(length), kContent)) << length;
             EXPECT_EQ(secureTimestamp(ByteView(whole).first(length)), std::nullopt) << length;
         }
     }
 }
 
 TEST(SecureTimestamp, IsTheTokensTime) {
-    EXPECT_EQ(secureTimestamp(CmsBuilder(kSignedContent).timestamp(TimestampBuilder()).build()), kStampedAt);
-    EXPECT_EQ(secureTimestamp(CmsBuilder(kSignedContent).ber().timestamp(TimestampBuilder()).build()),
+    EXPECT_EQ(secureTimestamp(CmsBuilder(kContent).timestamp(TimestampBuilder()).build()), kStampedAt);
+    EXPECT_EQ(secureTimestamp(CmsBuilder(kContent).ber().timestamp(TimestampBuilder()).build()), kStampedAt);
+    EXPECT_EQ(secureTimestamp(CmsBuilder(kContent).timestamp(TimestampBuilder().imprintDigest(4)).build()),
               kStampedAt);
-    EXPECT_EQ(
-        secureTimestamp(CmsBuilder(kSignedContent).timestamp(TimestampBuilder().imprintDigest(4)).build()),
-        kStampedAt);
 }
 
 TEST(SecureTimestamp, MayHaveFractionsOfASecond) {
     const auto token = TimestampBuilder().time("20261120195500.75Z");
-    EXPECT_EQ(secureTimestamp(CmsBuilder(kSignedContent).timestamp(token).build()), kStampedAt);
+    EXPECT_EQ(secureTimestamp(CmsBuilder(kContent).timestamp(token).build()), kStampedAt);
 }
 
 TEST(SecureTimestamp, LeavesTheSignatureAsItWas) {
-    EXPECT_TRUE(
-        verifyDetachedCms(CmsBuilder(kSignedContent).timestamp(TimestampBuilder()).build(), kSignedContent));
+    EXPECT_TRUE(verifyDetachedCms(CmsBuilder(kContent).timestamp(TimestampBuilder()).build(), kContent));
     const auto broken = TimestampBuilder().brokenSignature();
-    EXPECT_TRUE(verifyDetachedCms(CmsBuilder(kSignedContent).timestamp(broken).build(), kSignedContent));
+    EXPECT_TRUE(verifyDetachedCms(CmsBuilder(kContent).timestamp(broken).build(), kContent));
 }
 
 TEST(SecureTimestamp, IsNothingWithoutAToken) {
-    EXPECT_EQ(secureTimestamp(CmsBuilder(kSignedContent).build()), std::nullopt);
+    EXPECT_EQ(secureTimestamp(CmsBuilder(kContent).build()), std::nullopt);
     EXPECT_EQ(secureTimestamp({}), std::nullopt);
 }
 
 TEST(SecureTimestamp, IsNothingWhenTheTokenIsBroken) {
     const auto stamped = [](const TimestampBuilder& token) {
-        return secureTimestamp(CmsBuilder(kSignedContent).timestamp(token).build());
+        return secureTimestamp(CmsBuilder(kContent).timestamp(token).build());
     };
     EXPECT_EQ(stamped(TimestampBuilder().brokenSignature()), std::nullopt);
     EXPECT_EQ(stamped(TimestampBuilder().withoutCertificate()), std::nullopt);
@@ -126,11 +121,11 @@ TEST(SecureTimestamp, IsNothingWhenTheTokenIsBroken) {
 
 TEST(SecureTimestamp, IsNothingWhenTheImprintIsOfAnotherSignature) {
     const auto token = TimestampBuilder().imprintOf(foundation::toData("another signature value"));
-    EXPECT_EQ(secureTimestamp(CmsBuilder(kSignedContent).timestamp(token).build()), std::nullopt);
+    EXPECT_EQ(secureTimestamp(CmsBuilder(kContent).timestamp(token).build()), std::nullopt);
 }
 
 TEST(SecureTimestamp, IsNothingWhenTwoTokensDisagree) {
-    const Data cms = CmsBuilder(kSignedContent)
+    const Data cms = CmsBuilder(kContent)
                          .timestamp(TimestampBuilder())
                          .timestamp(TimestampBuilder().time("20200101000000Z"))
                          .build();

@@ -39,6 +39,41 @@ TEST_F(StaticValidity, RefusesTwoCodeDirectoriesInOneSlot) {
               kInvalidSignature);
 }
 
+TEST_F(StaticValidity, RefusesTwoEntriesForASlotThatIsRead) {
+    for (const std::uint32_t slot : {2U, 5U, 7U, 0x1000U, 0x10000U}) {
+        const auto once = SuperBlobBuilder()
+                              .blob(0, directoryOf(2))
+                              .blob(slot, slot == 0x10000  ? makeBlob(0xFADE0B01, {})
+                                          : slot == 0x1000 ? directoryOf(1)
+                                                           : emptyRequirements());
+        EXPECT_EQ(validityOf(once), kSuccess) << slot;
+        EXPECT_EQ(validityOf(SuperBlobBuilder(once).blob(slot, makeBlob(0xFADE0B01, {}))), kInvalidSignature)
+            << slot;
+    }
+}
+
+TEST_F(StaticValidity, IsNotAMatterOfOtherSlots) {
+    auto tickets = SuperBlobBuilder().blob(0, directoryOf(2));
+    for (int i = 0; i < 3; ++i) tickets.blob(0x10002, makeBlob(0xFADE0B01, Data(10)));
+    EXPECT_EQ(validityOf(tickets), kSuccess);
+    EXPECT_EQ(
+        validityOf(SuperBlobBuilder(tickets).blob(1, {}).blob(6, makeBlob(0, {})).blob(6, makeBlob(0, {}))),
+        kInvalidSignature)
+        << "one of them is no blob";
+    EXPECT_EQ(validityOf(SuperBlobBuilder(tickets).blob(6, makeBlob(0, {})).blob(6, makeBlob(0, {}))),
+              kSuccess);
+}
+
+TEST_F(StaticValidity, RefusesBlobsThatOverlapInAnySlot) {
+    const auto two =
+        SuperBlobBuilder().blob(0, directoryOf(2)).blob(0x10002, makeBlob(0xFADE0B01, makeBlob(0, {})));
+    EXPECT_EQ(validityOf(two), kSuccess);
+    const auto inner =
+        static_cast<std::uint32_t>(SuperBlobBuilder(two).blob(0x10003, makeBlob(0, {})).build().size() - 16);
+    EXPECT_EQ(validityOf(SuperBlobBuilder(two).blob(0x10003, makeBlob(0, {})).offsetOf(0x10003, inner)),
+              kInvalidSignature);
+}
+
 TEST_F(StaticValidity, RefusesAlternatesWithoutAPrimaryDirectory) {
     EXPECT_EQ(validityOf(SuperBlobBuilder().blob(0x1000, directoryOf(2))), kInvalidSignature);
 }

@@ -114,9 +114,18 @@ TEST(SuperBlob, RefusesABlobLongerThanTheSuperBlob) {
     EXPECT_THROW(parseSuperBlob(SuperBlobBuilder().blob(0, blob).build()), ShortRead);
 }
 
-TEST(SuperBlob, RefusesTwoEntriesForOneSlot) {
-    const auto builder = SuperBlobBuilder().blob(2, makeBlob(0xA0, {})).blob(2, makeBlob(0xA1, {}));
-    EXPECT_THROW(parseSuperBlob(builder.build()), CodeError);
+SuperBlobBuilder twice(std::uint32_t slot) {
+    return SuperBlobBuilder().blob(slot, makeBlob(0xA0, {})).blob(slot, makeBlob(0xA1, {}));
+}
+
+TEST(SuperBlob, RefusesTwoEntriesForASlotOfTheSignature) {
+    for (const std::uint32_t slot : {0U, 2U, 5U, 7U, 0x1000U, 0x1001U, 0x1002U, 0x1003U, 0x1004U, 0x10000U})
+        EXPECT_THROW(parseSuperBlob(twice(slot).build()), CodeError) << slot;
+}
+
+TEST(SuperBlob, MayHaveSeveralEntriesForAnyOtherSlot) {
+    for (const std::uint32_t slot : {1U, 3U, 4U, 6U, 8U, 0xFFFU, 0x1005U, 0x10001U, 0x10002U, 0xFFFFFFFFU})
+        EXPECT_EQ(parseSuperBlob(twice(slot).build()).size(), 2U) << slot;
 }
 
 TEST(SuperBlob, RefusesTwoSlotsOnOneBlob) {

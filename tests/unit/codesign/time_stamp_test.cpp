@@ -1,12 +1,10 @@
 // The time-stamp token of a signer's message: the bounds that hold for it, and its time.
 #include <gtest/gtest.h>
 
+#include "cms_fixture.h"
 #include "codesign/cms_message.h"
 #include "codesign/cms_signature.h"
 #include "codesign/signer_key.h"
-#include "support/cms_parts.h"
-#include "support/cms_signer.h"
-#include "support/ticket_builder.h"
 
 namespace pinwell::test {
 namespace {
@@ -16,23 +14,7 @@ using codesign::kMaximumDigestAlgorithms;
 using codesign::kMaximumRsaBits;
 using codesign::secureTimestamp;
 
-const Data kContent = foundation::toData("a code directory");
-
 constexpr std::string_view kTimeStampToken = "\x2A\x86\x48\x86\xF7\x0D\x01\x09\x10\x02\x0E";
-constexpr std::string_view kTimeStampContent = "\x2A\x86\x48\x86\xF7\x0D\x01\x09\x10\x01\x04";
-
-CmsParts goodParts() {
-    return CmsParts::of(CmsBuilder(kContent).build());
-}
-CmsSignerParts& signerOf(CmsParts& parts) {
-    return parts.signers.front();
-}
-Data identifier(std::string_view contents) {
-    return derElement(0x06, foundation::asBytes(contents));
-}
-Data number(int value) {
-    return derElement(0x02, Data{static_cast<std::byte>(value)});
-}
 
 class TokenBounds : public testing::Test {
   protected:
