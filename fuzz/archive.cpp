@@ -1,30 +1,43 @@
 // A package archive: header, compressed table of contents, signatures and checksum.
 #include <xar/xar.h>
 
+#include <algorithm>
 #include <cstdlib>
 #include <cstring>
 #include <memory>
 
+#include "foundation/byte_reader.h"
 #include "scratch_file.h"
 #include "target.h"
+#include "xar/header.h"
 
 namespace pinwell::fuzz {
 namespace {
-
-constexpr std::uint32_t kLongestChecksum = 64;
 
 struct FreeMemory {
     void operator()(void* memory) const noexcept { std::free(memory); }
 };
 
-void examineSignature(xar_signature_t signature) {
+/// The checksum of the table of contents of an archive that was opened.
+Data computedChecksum(ByteView archive) {
+    const auto header = xar::parseHeader(archive.first(std::min(archive.size(), xar::kLongestHeaderRead)));
+    require(header.has_value(), "an archive has a header");
+    xar::Digest digest(header->algorithm);
+    foundation::ByteReader reader(archive);
+    reader.skip(header->size, "header");
+    digest.update(reader.bytes(header->compressedLength, "table of contents"));
+    return digest.finish();
+}
+
+void examineSignature(xar_signature_t signature, const Data& checksum) {
     if (const char* type = xar_signature_type(signature)) static_cast<void>(std::strlen(type));
     std::uint8_t* bytes = nullptr;
     std::uint32_t length = 0;
     const auto status = xar_signature_copy_signed_data(signature, &bytes, &length, nullptr, nullptr, nullptr);
     const std::unique_ptr<std::uint8_t, FreeMemory> owner(bytes);
-    if (status != 0) return;
-    require(bytes != nullptr && length > 0 && length <= kLongestChecksum, "what is signed is a checksum");
+    require(status == 0, "a signature signs something");
+    require(foundation::toData(std::as_bytes(std::span(bytes, length))) == checksum && !checksum.empty(),
+            "what is signed is the checksum of the table");
 }
 
 }  // namespace
@@ -33,10 +46,11 @@ void examine(ByteView input) {
     const ScratchFile file(input);
     xar_t archive = xar_open(file.path().c_str(), 0);
     if (archive == nullptr) return;
+    const Data checksum = computedChecksum(input);
     std::size_t count = 0;
     for (auto signature = xar_signature_first(archive); signature != nullptr;
          signature = xar_signature_next(signature)) {
-        examineSignature(signature);
+        examineSignature(signature, checksum);
         ++count;
     }
     require(count <= std::size_t{1} << 16U, "signatures are counted");

@@ -19,6 +19,9 @@ using foundation::Data;
 
 constexpr std::size_t kDigestedAtOnce = std::size_t{64} * 1024;
 
+constexpr std::string_view kOffsetPath = "checksum/offset";
+constexpr std::string_view kSizePath = "checksum/size";
+
 template <class Call>
 auto uninterrupted(Call call) {
     for (;;) {
@@ -47,10 +50,9 @@ std::unique_ptr<Archive> Archive::open(const std::string& path) {
     const auto start = archive->read(
         0, static_cast<std::size_t>(std::min<std::uint64_t>(kLongestHeaderRead, archive->fileSize_)));
     const auto header = start ? parseHeader(*start) : std::nullopt;
-    if (!header || !archive->readTable(*header) || !archive->locateChecksum(header->algorithm))
+    if (!header || !archive->readTable(*header) || !archive->isChecksumDescribed(header->algorithm))
         return nullptr;
-    if (header->algorithm != DigestAlgorithm::none && archive->storedChecksum() != archive->computedChecksum_)
-        return nullptr;
+    if (header->algorithm != DigestAlgorithm::none && !archive->isChecksumStored()) return nullptr;
     return archive;
 }
 
@@ -102,34 +104,34 @@ bool Archive::readTable(const Header& header) {
     auto table = inflater.complete() ? reader.finish() : std::nullopt;
     if (!table) return false;
     table_ = *std::move(table);
-    computedChecksum_ = digest.finish();
+    checksum_ = digest.finish();
     heapStart_ = at;
     return true;
 }
 
-bool Archive::locateChecksum(DigestAlgorithm algorithm) {
-    const auto number = [&](std::string_view path, std::uint64_t otherwise) -> std::optional<std::uint64_t> {
-        const auto found = table_.properties.find(path);
-        if (found != table_.properties.end()) return leadingNumber(found->second);
-        // A signature would then sign bytes of which nobody has said where they stand.
-        return table_.signatures.empty() ? std::optional(otherwise) : std::nullopt;
-    };
-
-    const bool isDescribed = table_.properties.find("checksum") != table_.properties.end();
-    if (isDescribed || algorithm != DigestAlgorithm::none) {
-        if (!table_.checksumStyle || digestAlgorithmNamed(*table_.checksumStyle) != algorithm) return false;
-    }
-    const auto offset = number("checksum/offset", 0);
-    const auto size = number("checksum/size", digestSize(algorithm));
-    if (!offset || !size) return false;
-    if (algorithm != DigestAlgorithm::none && *size != digestSize(algorithm)) return false;
-    checksum_ = {*offset, *size};
-    return true;
+// Whether the table speaks of the header's checksum, and of no other one.
+bool Archive::isChecksumDescribed(DigestAlgorithm algorithm) const {
+    const bool isSigned = !table_.signatures.empty();
+    if (algorithm == DigestAlgorithm::none && isSigned) return false;
+    const bool hasElement = table_.properties.find("checksum") != table_.properties.end();
+    if (!hasElement && algorithm == DigestAlgorithm::none) return true;
+    if (!table_.checksumStyle || digestAlgorithmNamed(*table_.checksumStyle) != algorithm) return false;
+    // A signature would sign bytes of which nobody has said where they are.
+    const bool isPlaced = table_.properties.find(kOffsetPath) != table_.properties.end() &&
+                          table_.properties.find(kSizePath) != table_.properties.end();
+    return isPlaced || !isSigned;
 }
 
-std::optional<Data> Archive::storedChecksum() const {
-    if (checksum_.size > kLongestDigest || checksum_.offset > fileSize_ - heapStart_) return std::nullopt;
-    return read(heapStart_ + checksum_.offset, static_cast<std::size_t>(checksum_.size));
+// Without an offset the checksum is at the start of the heap, without a size it is as long as it must be.
+bool Archive::isChecksumStored() const {
+    const auto number = [&](std::string_view path, std::uint64_t otherwise) {
+        const auto found = table_.properties.find(path);
+        return found == table_.properties.end() ? std::optional(otherwise) : leadingNumber(found->second);
+    };
+    const auto offset = number(kOffsetPath, 0);
+    const auto size = number(kSizePath, checksum_.size());
+    if (!offset || *offset > fileSize_ - heapStart_ || size != checksum_.size()) return false;
+    return read(heapStart_ + *offset, checksum_.size()) == checksum_;
 }
 
 }  // namespace pinwell::xar

@@ -16,34 +16,31 @@ namespace pinwell::xar {
 
 class Archive {
   public:
-    /// The archive at `path`, its table of contents verified; null when it cannot be. Throws std::bad_alloc.
+    /// The archive at `path`, its table of contents compared with the checksum in the heap. Returns null if
+    /// they differ or one cannot be read, and for an archive with signatures but without an algorithm for the
+    /// checksum: what those sign would be anything. Throws std::bad_alloc.
     static std::unique_ptr<Archive> open(const std::string& path);
 
     const TableOfContents& table() const noexcept { return table_; }
 
-    /// The checksum of the table of contents as it stands in the heap now; nothing when it cannot be read.
-    std::optional<foundation::Data> storedChecksum() const;
+    /// The checksum of the table of contents: computed, and found in the heap, when the archive was opened.
+    /// Empty for an archive without an algorithm, which has no signatures.
+    const foundation::Data& checksum() const noexcept { return checksum_; }
 
   private:
-    // Where the checksum stands, counted from the start of the heap.
-    struct Place {
-        std::uint64_t offset = 0;
-        std::uint64_t size = 0;
-    };
-
     Archive() = default;
 
     bool openFile(const std::string& path);
     std::optional<foundation::Data> read(std::uint64_t offset, std::size_t length) const;
     bool readTable(const Header& header);
-    bool locateChecksum(DigestAlgorithm algorithm);
+    bool isChecksumDescribed(DigestAlgorithm algorithm) const;
+    bool isChecksumStored() const;
 
     foundation::FileDescriptor file_;
     std::uint64_t fileSize_ = 0;
     std::uint64_t heapStart_ = 0;
     TableOfContents table_;
-    foundation::Data computedChecksum_;
-    Place checksum_;
+    foundation::Data checksum_;
 };
 
 }  // namespace pinwell::xar

@@ -47,17 +47,11 @@ const EVP_MD* implementation(DigestAlgorithm algorithm) {
     return nullptr;
 }
 
-char lowerCase(char c) {
-    return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
-}
-
 }  // namespace
 
 std::optional<DigestAlgorithm> digestAlgorithmNamed(std::string_view name) {
-    const auto* const found = std::find_if(kKnown.begin(), kKnown.end(), [&](const Known& known) {
-        return std::equal(name.begin(), name.end(), known.name.begin(), known.name.end(),
-                          [](char given, char wanted) { return lowerCase(given) == wanted; });
-    });
+    const auto* const found =
+        std::find_if(kKnown.begin(), kKnown.end(), [&](const Known& known) { return known.name == name; });
     return found == kKnown.end() ? std::nullopt : std::optional(found->algorithm);
 }
 

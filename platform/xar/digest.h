@@ -11,7 +11,8 @@ namespace pinwell::xar {
 
 enum class DigestAlgorithm { none, md5, sha1, sha224, sha256, sha384, sha512 };
 
-/// By its lower-case or upper-case name, "none" included; nothing for a name that is not one.
+/// By its name in lower case, "none" included. Returns `nullopt` for any other spelling: who compares names
+/// without regard to case, and who does not, would not read the same archives.
 std::optional<DigestAlgorithm> digestAlgorithmNamed(std::string_view name);
 
 /// In bytes; 0 for none.

@@ -36,7 +36,8 @@ struct Header {
     DigestAlgorithm algorithm = DigestAlgorithm::none;
 };
 
-/// The header that `bytes`, the file's first kLongestHeaderRead at most, begin with.
+/// The header that `bytes`, the file's first kLongestHeaderRead at most, begin with. Returns `nullopt` if
+/// they begin with none.
 std::optional<Header> parseHeader(foundation::ByteView bytes);
 
 }  // namespace pinwell::xar

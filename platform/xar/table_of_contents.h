@@ -14,8 +14,8 @@
 // counts, but a second checksum, or a second offset or size in it, is refused: readers must not differ in
 // what is checked.
 //
-// Refused besides: what is not well-formed, or has a document type or an entity of its own (markup_guard.h);
-// a root other than `xar`; no `toc`, or two; and what passes a limit below.
+// Refused besides: what foundation/xml_parser.h refuses, and any document type; a root other than `xar`; no
+// `toc`, or two; and what passes a limit below.
 #pragma once
 
 #include <cstdint>
@@ -26,7 +26,6 @@
 #include <vector>
 
 #include "foundation/bytes.h"
-#include "xar/markup_guard.h"
 
 namespace pinwell::xar {
 
@@ -36,21 +35,21 @@ inline constexpr std::uint64_t kMaximumTableOfContents = 64ULL * 1024 * 1024;
 /// Elements inside one another, the root included.
 inline constexpr std::size_t kMaximumDepth = 64;
 
-inline constexpr std::size_t kMaximumElements = std::size_t{1} << 22U;
-inline constexpr std::size_t kMaximumSignatures = std::size_t{1} << 16U;
-inline constexpr std::size_t kMaximumProperties = std::size_t{1} << 12U;
-
-/// Distinct names of elements, attributes and prefixes: their length together, in bytes.
-inline constexpr std::size_t kMaximumNames = std::size_t{1} << 20U;
+inline constexpr std::size_t kMaximumElements = 4 * 1024 * 1024;
+inline constexpr std::size_t kMaximumSignatures = 64 * 1024;
+inline constexpr std::size_t kMaximumProperties = 4096;
 
 /// Length of a property's path, in bytes.
 inline constexpr std::size_t kMaximumPath = 1024;
 
+/// What is kept of a table, styles and the text of properties, in bytes.
+inline constexpr std::size_t kMaximumKept = 1024 * 1024;
+
 struct TableOfContents {
-    /// Each signature's style, in document order; nothing for one that has none.
+    /// Each signature's style, in document order; `nullopt` for one that has none.
     std::vector<std::optional<std::string>> signatures;
 
-    /// Text by path ("checksum/size"); nothing for an element without any, or with white space alone.
+    /// Text by path ("checksum/size"); `nullopt` for an element without any, or with white space alone.
     std::map<std::string, std::optional<std::string>, std::less<>> properties;
 
     std::optional<std::string> checksumStyle;
@@ -65,17 +64,16 @@ class TableOfContentsReader {
     TableOfContentsReader(const TableOfContentsReader&) = delete;
     TableOfContentsReader& operator=(const TableOfContentsReader&) = delete;
 
-    /// False when the document is refused: then no more must be fed.
+    /// Returns false if the document is refused: then no more must be fed. Throws std::bad_alloc.
     bool feed(foundation::ByteView bytes);
 
-    /// Once, and last: the table, or nothing when the document is refused.
+    /// Once, and last. Returns `nullopt` if the document is refused. Throws std::bad_alloc.
     std::optional<TableOfContents> finish();
 
   private:
-    class Parser;
+    class Document;
 
-    MarkupGuard guard_;
-    std::unique_ptr<Parser> parser_;
+    std::unique_ptr<Document> document_;
 };
 
 }  // namespace pinwell::xar

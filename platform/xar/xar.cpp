@@ -74,20 +74,16 @@ uint8_t xar_signature_copy_signed_data(xar_signature_t sig, uint8_t** data, uint
     constexpr auto kFailed = static_cast<uint8_t>(kFailure);
     if (data == nullptr || length == nullptr) return kFailed;
     if (signed_data != nullptr || signed_length != nullptr || signed_offset != nullptr) return kFailed;
-    try {
-        const auto checksum = sig->archive->contents->storedChecksum();
-        if (!checksum || checksum->empty()) return kFailed;
-        // The caller frees it, as the prototype says.
-        auto* const copy = static_cast<uint8_t*>(std::malloc(checksum->size()));  // NOLINT(*-no-malloc)
-        if (copy == nullptr) return kFailed;
-        std::transform(checksum->begin(), checksum->end(), copy,
-                       [](std::byte byte) { return std::to_integer<uint8_t>(byte); });
-        *data = copy;
-        *length = static_cast<uint32_t>(checksum->size());
-        return 0;
-    } catch (const std::exception&) {
-        return kFailed;
-    }
+    const auto& checksum = sig->archive->contents->checksum();
+    if (checksum.empty()) return kFailed;
+    // The caller frees it, as the prototype says.
+    auto* const copy = static_cast<uint8_t*>(std::malloc(checksum.size()));  // NOLINT(*-no-malloc)
+    if (copy == nullptr) return kFailed;
+    std::transform(checksum.begin(), checksum.end(), copy,
+                   [](std::byte byte) { return std::to_integer<uint8_t>(byte); });
+    *data = copy;
+    *length = static_cast<uint32_t>(checksum.size());
+    return 0;
 }
 
 int32_t xar_prop_get(xar_file_t f, const char* key, const char** value) {

@@ -27,11 +27,11 @@ struct CostlyInput {
     /// Reads an input as the programs do. Returns whether it was taken, false if it was refused.
     std::function<bool(const Data&)> read;
 
-    /// What becomes of the costly input at half a mebibyte. The control is always taken.
+    /// What becomes of the costly input at a quarter of a mebibyte. The control is always taken.
     bool isTaken = false;
 
-    /// An input of about `length` bytes, and never more than a few kibibytes longer. The same for the same
-    /// length.
+    /// An input of about `length` bytes, and not much longer. The same for the same
+    /// length. The control of a compressed input may hold what that comes to, and be longer.
     std::function<Data(std::size_t length)> costly;
     std::function<Data(std::size_t length)> control;
 
@@ -51,6 +51,8 @@ std::string filled(std::string_view text, std::size_t length);
 std::string filled(const std::function<std::string(std::size_t)>& make, std::size_t length);
 
 // The rows, a function for each group.
+std::vector<CostlyInput> archiveInputs();
 std::vector<CostlyInput> jsonInputs();
+std::vector<CostlyInput> propertyListInputs();
 
 }  // namespace pinwell::test

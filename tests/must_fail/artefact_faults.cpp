@@ -201,6 +201,79 @@ std::vector<PackageFault> packageFaults() {
     };
 }
 
+// Archives that are another's and claim the good one's checksum, or leave in doubt what their signature signs.
+
+/// The checksum that the ticket is for, in an archive with other contents; and where it is in the heap.
+constexpr const char* kPlace = "<offset>0</offset><size>20</size>";
+ArchiveBuilder otherArchive() {
+    return ArchiveBuilder().element("<extra/>").afterChecksum(irregularData(kOwnData));
+}
+ArchiveBuilder forged() {
+    return otherArchive().checksum(archive().rightChecksum());
+}
+/// The other archive's own checksum first, which is right, and behind it the one that the ticket is for.
+ArchiveBuilder withBoth(const std::string& element) {
+    return otherArchive().afterChecksum(archive().rightChecksum()).checksumElement(element).signature("CMS");
+}
+std::string checksum(const std::string& style, const std::string& inside) {
+    return "<checksum style='" + style + "'>" + inside + "</checksum>";
+}
+std::string table(const std::string& children) {
+    return "<xar><toc>" + checksum("sha1", kPlace) + "<signature style='CMS'/>" + children + "</toc></xar>";
+}
+
+struct ArchiveFault {
+    const char* name;
+    const char* wrong;
+    std::function<ArchiveBuilder()> make;
+};
+
+std::vector<ArchiveFault> archiveFaults() {
+    const std::string right = kPlace;
+    const std::string other = "<offset>20</offset><size>20</size>";
+    return {
+        {"ChecksumForged", "another archive with the checksum that the ticket is for", [] { return forged().signature("CMS"); }},
+        {"NoAlgorithm", "the header names no algorithm, and the heap holds the checksum that the ticket is for", [] { return forged().algorithm(0).checksumElement(checksum("none", kPlace)).signature("CMS"); }},
+        {"NoAlgorithmButAStyle", "the header names no algorithm, the table does", [] { return forged().algorithm(0).signature("CMS"); }},
+        {"NoAlgorithmAndNoElement", "neither header nor table speak of a checksum", [] { return forged().algorithm(0).checksumElement("").signature("CMS"); }},
+        {"NoAlgorithmAndTheOtherSignature", "the header names no algorithm, the signature is of the newer element", [] { return forged().algorithm(0).checksumElement(checksum("none", kPlace)).element("<x-signature style='CMS'/>"); }},
+        {"NoAlgorithmAndAnEmptyStyle", "the header names no algorithm, the style is empty", [] { return forged().algorithm(0).checksumElement(checksum("", kPlace)).signature("CMS"); }},
+        {"AlgorithmCalledNone", "the header has the name of an algorithm, and it is none", [] { return forged().algorithm(3).headerTail(foundation::toData(std::string_view("none\0\0\0", 8))).checksumElement(checksum("none", kPlace)).signature("CMS"); }},
+        {"AlgorithmWithoutAName", "the header has an empty name for its algorithm", [] { return forged().algorithm(3).headerTail(Data(8)).checksumElement(checksum("", kPlace)).signature("CMS"); }},
+        {"AlgorithmInCapitals", "the name of the header's algorithm is in capitals", [] { return otherArchive().digest("sha256").algorithm(3).headerTail(foundation::toData(std::string_view("SHA256\0\0", 8))).signature("CMS"); }},
+        {"AlgorithmUnknown", "the header's algorithm is one that nobody knows", [] { return forged().algorithm(77).signature("CMS"); }},
+        {"StyleInCapitals", "the checksum's style is in capitals", [] { return otherArchive().checksumStyle("SHA1").signature("CMS"); }},
+        {"StyleOfAnother", "the checksum's style is not the header's", [] { return otherArchive().checksumStyle("sha256").signature("CMS"); }},
+        {"StyleNone", "the checksum's style says that there is none", [] { return forged().checksumStyle("none").signature("CMS"); }},
+        {"StyleMissing", "the checksum has no style", [] { return otherArchive().checksumElement(std::string("<checksum>") + kPlace + "</checksum>").signature("CMS"); }},
+        {"StyleOfAnotherNameSpace", "the style is another name space's", [] { return otherArchive().checksumElement(std::string("<checksum x:style='sha1'>") + kPlace + "</checksum>").signature("CMS"); }},
+        {"TwoChecksums", "two checksums: the first is right, the second the one that the ticket is for", [=] { return withBoth(checksum("sha1", right) + checksum("sha1", other)); }},
+        {"TwoChecksumsTheFirstForged", "two checksums: the first is the one that the ticket is for, the second right", [=] { return withBoth(checksum("sha1", other) + checksum("sha1", right)); }},
+        {"TwoChecksumsOfTwoNameSpaces", "two checksums, one of them of a name space of its own", [=] { return withBoth(checksum("sha1", right) + "<x:checksum style='sha1'>" + other + "</x:checksum>"); }},
+        {"TwoOffsets", "two offsets: the second leads to the checksum that the ticket is for", [] { return withBoth(checksum("sha1", std::string(kPlace) + "<offset>20</offset>")); }},
+        {"TwoOffsetsTheFirstForged", "two offsets: the first leads to the checksum that the ticket is for", [] { return withBoth(checksum("sha1", std::string("<offset>20</offset>") + kPlace)); }},
+        {"TwoSizes", "two sizes", [] { return withBoth(checksum("sha1", std::string(kPlace) + "<size>20</size>")); }},
+        {"TwoOffsetsOfTwoNameSpaces", "two offsets, one of them of a name space of its own", [] { return withBoth(checksum("sha1", std::string(kPlace) + "<x:offset>20</x:offset>")); }},
+        {"OffsetForged", "the offset leads to the checksum that the ticket is for", [=] { return withBoth(checksum("sha1", other)); }},
+        {"OffsetMissing", "a signature, and nothing that says where the checksum is", [] { return otherArchive().checksumElement(checksum("sha1", "<size>20</size>")).signature("CMS"); }},
+        {"SizeMissing", "a signature, and nothing that says how long the checksum is", [] { return otherArchive().checksumElement(checksum("sha1", "<offset>0</offset>")).signature("CMS"); }},
+        {"SizeOfAnother", "the size is another algorithm's", [] { return otherArchive().checksumSize("32").signature("CMS"); }},
+        {"SizeEmpty", "the size is empty", [] { return otherArchive().checksumElement(checksum("sha1", "<offset>0</offset><size/>")).signature("CMS"); }},
+        {"OffsetNegative", "a negative offset", [] { return otherArchive().checksumOffset("-20").signature("CMS"); }},
+        {"OffsetHighest", "offset and heap together wrap around", [] { return otherArchive().checksumOffset("18446744073709551615").signature("CMS"); }},
+        {"TwoTables", "two tables of contents", [] { return ArchiveBuilder().toc("<xar><toc>" + checksum("sha1", kPlace) + "<signature style='CMS'/></toc><toc/></xar>"); }},
+        {"DocumentType", "a document type before the table", [] { return ArchiveBuilder().toc("<!DOCTYPE xar SYSTEM 'xar.dtd'>" + table("")); }},
+        {"EntityForTheSize", "the size is an entity", [] { return ArchiveBuilder().toc("<!DOCTYPE xar [<!ENTITY s '20'>]><xar><toc>" + checksum("sha1", "<offset>0</offset><size>&s;</size>") + "<signature style='CMS'/></toc></xar>"); }},
+        {"AnotherEncoding", "a table in an encoding that hides its markup", [] { return ArchiveBuilder().toc("<?xml version='1.0' encoding='UTF-7'?>" + table("")); }},
+        {"TwoEncodings", "a mark of one encoding before the declaration of another", [] { return ArchiveBuilder().toc("\xEF\xBB\xBF<?xml version='1.0' encoding='ISO-8859-1'?>" + table("")); }},
+        {"TableOneLonger", "the header takes a byte of the heap into the table", [] { const ArchiveBuilder a = otherArchive().signature("CMS"); return ArchiveBuilder(a).compressedLength(a.heapStart() - 28 + 1); }},
+        {"TableOneShorter", "the header leaves the table's last byte to the heap", [] { const ArchiveBuilder a = otherArchive().signature("CMS"); return ArchiveBuilder(a).compressedLength(a.heapStart() - 28 - 1); }},
+        {"SignatureInCapitals", "an element that is called like a signature, in capitals", [] { return otherArchive().element("<SIGNATURE style='CMS'/>"); }},
+        {"SignatureOfAFile", "the only signature is inside a file", [] { return otherArchive().element("<file><signature style='CMS'/></file>"); }},
+        {"SignatureTypeInLowerCase", "the only signature is of the type \"cms\"", [] { return otherArchive().signature("cms"); }},
+    };
+}
+
 // Bundles.
 
 /// The subject's own unless another identifier is given.
@@ -255,6 +328,17 @@ std::vector<ArtefactFault> artefactFaults() {
         faults.push_back(
             {std::string("Image") + fault.name, fault.wrong, "signedImage", fault.exit,
              [make = fault.make](Path path, const I& i) { writeFile(path, ByteView(make(i))); }});
+    }
+    for (const ArchiveFault& fault : archiveFaults()) {
+        faults.push_back({std::string("Archive") + fault.name, fault.wrong, "package", kUnusable,
+                          [make = fault.make](Path path, const I& i) {
+                              const Data ticket = goodTicket(subjectNamed("package"), i);
+                              writeFile(path, PackageBuilder()
+                                                  .archive(make().build())
+                                                  .terminator()
+                                                  .ticket(foundation::toString(ticket))
+                                                  .build());
+                          }});
     }
     for (const PackageFault& fault : packageFaults()) {
         faults.push_back({std::string("Package") + fault.name, fault.wrong, "package", fault.exit,

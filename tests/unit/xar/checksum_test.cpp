@@ -59,7 +59,19 @@ TEST_F(ArchiveChecksum, AStyleOtherThanTheHeadersAlgorithmIsRefused) {
     EXPECT_FALSE(opens(ArchiveBuilder().checksumStyle("none")));
     EXPECT_FALSE(opens(ArchiveBuilder().checksumStyle("sha1 ")));
     EXPECT_FALSE(opens(ArchiveBuilder().checksumStyle("")));
-    EXPECT_TRUE(opens(ArchiveBuilder().checksumStyle("SHA1")));
+    for (const char* style : {"SHA1", "Sha1", "sha-1", "sha", "sha1\xC2\xA0"})
+        EXPECT_FALSE(opens(ArchiveBuilder().checksumStyle(style))) << style;
+    EXPECT_TRUE(opens(ArchiveBuilder().checksumStyle("sha1")));
+    EXPECT_FALSE(opens(ArchiveBuilder().digest("sha256").checksumStyle("SHA256")));
+}
+
+TEST_F(ArchiveChecksum, AStyleOfAnotherNameSpaceIsNone) {
+    const std::string inside = "<offset>0</offset><size>20</size></checksum>";
+    EXPECT_FALSE(opens(ArchiveBuilder().checksumElement("<checksum x:style='sha1'>" + inside)));
+    EXPECT_FALSE(opens(ArchiveBuilder().checksumElement("<checksum Style='sha1'>" + inside)));
+    EXPECT_FALSE(opens(ArchiveBuilder().checksumElement("<checksum x:style='sha1' style='md5'>" + inside)));
+    EXPECT_TRUE(opens(ArchiveBuilder().checksumElement("<checksum x:style='md5' style='sha1'>" + inside)));
+    EXPECT_FALSE(opens(ArchiveBuilder().checksumElement("<checksum style='sha1' style='sha1'>" + inside)));
 }
 
 TEST_F(ArchiveChecksum, AHeaderThatSaysNoneDoesNotSwitchItOff) {
@@ -80,7 +92,23 @@ TEST_F(ArchiveChecksum, OfASignedArchiveNeedsOffsetAndSize) {
         "<checksum style='sha1'><size>20</size></checksum>")));
     EXPECT_FALSE(opens(ArchiveBuilder().signature("CMS").checksumElement(
         "<checksum style='sha1'><offset>0</offset></checksum>")));
-    EXPECT_FALSE(opens(ArchiveBuilder().digest("none").signature("CMS")));
+}
+
+TEST_F(ArchiveChecksum, OfASignedArchiveNeedsAnAlgorithm) {
+    for (const char* name : {"signature", "x-signature", "s:signature"})
+        for (const char* style : {"CMS", "RSA", ""}) {
+            const std::string element = "<" + std::string(name) + " style='" + style + "'/>";
+            EXPECT_FALSE(opens(ArchiveBuilder().digest("none").element(element))) << element;
+            EXPECT_FALSE(opens(
+                ArchiveBuilder()
+                    .digest("none")
+                    .checksumElement("<checksum style='none'><offset>2</offset><size>20</size></checksum>")
+                    .element(element)))
+                << element;
+            EXPECT_FALSE(opens(ArchiveBuilder().algorithm(0).element(element))) << element;
+            EXPECT_TRUE(opens(ArchiveBuilder().element(element))) << element;
+        }
+    EXPECT_TRUE(opens(ArchiveBuilder().digest("none"))) << "without a signature nothing is signed";
 }
 
 TEST_F(ArchiveChecksum, WithoutAnElementIsRefusedUnlessThereIsNoAlgorithm) {
@@ -101,6 +129,35 @@ TEST_F(ArchiveChecksum, InTwoElementsIsRefusedAndSoAreTwoOffsetsOrSizes) {
         "<checksum style='sha1'><offset>0</offset><offset>0</offset><size>20</size></checksum>")));
     EXPECT_FALSE(opens(ArchiveBuilder().checksumElement(
         "<checksum style='sha1'><offset>0</offset><size>20</size><size>20</size></checksum>")));
+}
+
+TEST_F(ArchiveChecksum, InTwoElementsIsRefusedHoweverTheSecondOneIsHidden) {
+    const std::string inside = "<offset>0</offset><size>20</size>";
+    const std::string whole = "<checksum style='sha1'>" + inside + "</checksum>";
+    for (const std::string& other : {"<x:checksum style='sha1'>" + inside + "</x:checksum>",
+                                     "<checksum xmlns='urn:x' style='sha1'>" + inside + "</checksum>",
+                                     std::string("<checksum/>"), std::string("<checksum style='md5'/>")}) {
+        EXPECT_FALSE(opens(ArchiveBuilder().checksumElement(whole + other))) << other;
+        EXPECT_FALSE(opens(ArchiveBuilder().checksumElement(other + whole))) << other;
+    }
+    for (const char* second : {"<x:size>20</x:size>", "<size/>", "<x:offset>0</x:offset>", "<offset/>"})
+        EXPECT_FALSE(opens(
+            ArchiveBuilder().checksumElement("<checksum style='sha1'>" + inside + second + "</checksum>")))
+            << second;
+    // What only looks like one.
+    for (const char* none : {"<!--<checksum/>-->", "<?x <checksum/>?>", "<a><![CDATA[<checksum/>]]></a>",
+                             "<a>&lt;checksum/&gt;</a>", "<Checksum/>", "<a><checksum/></a>"})
+        EXPECT_TRUE(opens(ArchiveBuilder().checksumElement(whole + none))) << none;
+}
+
+TEST_F(ArchiveChecksum, IsWhatTheSignaturesSignWhateverBecomesOfTheFileAfterwards) {
+    const ArchiveBuilder builder = ArchiveBuilder().signature("CMS");
+    const auto archive = open(builder);
+    ASSERT_NE(archive, nullptr);
+    Data changed = builder.build();
+    changed.at(builder.heapStart()) ^= std::byte{1};
+    writeFile(path, changed);
+    EXPECT_EQ(signedData(archive), builder.rightChecksum());
 }
 
 TEST_F(ArchiveChecksum, InsideAFileOrASignatureIsNotTheTables) {

@@ -66,12 +66,12 @@ TEST_F(ArchiveHeader, AlgorithmNumbersWithoutAMeaningAreRefused) {
 }
 
 TEST_F(ArchiveHeader, Algorithm3IsNamedBehindByte28) {
-    for (const char* name : {"sha1", "md5", "sha224", "sha256", "sha384", "sha512", "SHA256"})
+    for (const char* name : {"sha1", "md5", "sha224", "sha256", "sha384", "sha512"})
         EXPECT_TRUE(opens(ArchiveBuilder().namedDigest(name))) << name;
 }
 
 TEST_F(ArchiveHeader, ANameThatIsNoDigestIsRefused) {
-    for (const char* name : {"none", "sha3", "sha256x", "sha25"})
+    for (const char* name : {"none", "None", "sha3", "sha256x", "sha25", "SHA256", "Sha256"})
         EXPECT_FALSE(opens(ArchiveBuilder().namedDigest("sha256").headerTail([&] {
             Data tail = foundation::toData(name);
             tail.resize(12);

@@ -1,13 +1,12 @@
 /* Reading signed xar archives: the seven functions of the archive library that the tool calls, under their
- * names and prototypes, for systems that have no such library. It reads, and reads nothing but what is asked
- * for here: the table of contents, its checksum, and which signatures there are. Signature values and the
- * data of the files inside are not looked at.
+ * names and prototypes. It reads, and reads nothing but what is asked for here: the table of contents, its
+ * checksum, and which signatures there are. Signature values and the data of the files inside are not looked at.
  *
  * An archive is safe to open whatever is in it: memory and time are bounded
  * (platform/xar/table_of_contents.h). An open archive serves one thread at a time. Nothing is ever printed.
  */
-#ifndef PINWELL_BUNDLED_XAR_H
-#define PINWELL_BUNDLED_XAR_H
+#ifndef PINWELL_XAR_XAR_H
+#define PINWELL_XAR_XAR_H
 
 #include <stdint.h>
 
@@ -20,8 +19,9 @@ typedef const struct xar_archive_file* xar_file_t;
 typedef const struct xar_archive_signature* xar_signature_t;
 
 /* The archive at the path, a symbolic link followed, with its table of contents read and verified against the
- * checksum in the archive's heap. Null when any of that fails, and for any `flags` but 0 (reading). Never
- * blocks on what is not a regular file. The caller closes it. */
+ * checksum in the archive's heap. Returns null if any of that fails, for an archive that has signatures but names
+ * no algorithm for the checksum, and for any `flags` but 0 (reading). Never blocks on what is not a regular file.
+ * The caller closes it. */
 xar_t xar_open(const char* file, int32_t flags);
 
 /* Ends the life of the archive, of its signatures, and of every text that was handed out. 0. */
@@ -35,10 +35,9 @@ xar_signature_t xar_signature_next(xar_signature_t s);
 /* The signature's style as it is written; null when it has none. Borrowed from the archive. */
 char* xar_signature_type(xar_signature_t s);
 
-/* What the signature signs, which is the checksum of the table of contents, as it stands in the heap. 0, and
- * then
- * `*data` is the caller's to free(); otherwise the low 8 bits of -1, with nothing stored. This reader has no
- * signature values to hand out: the last three must be null. */
+/* What the signature signs, which is the checksum of the table of contents, as it was verified when the archive
+ * was opened. Returns 0, and then `*data` is the caller's to free(); otherwise the low 8 bits of -1, with nothing
+ * stored. This reader has no signature values to hand out: the last three must be null. */
 uint8_t xar_signature_copy_signed_data(xar_signature_t sig, uint8_t** data, uint32_t* length,
                                        uint8_t** signed_data, uint32_t* signed_length,
                                        uint32_t* signed_offset);
