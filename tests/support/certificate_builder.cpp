@@ -168,8 +168,7 @@ Data publicKeyDigest(X509* certificate) {
     return digest;
 }
 
-const EVP_MD* messageDigest(const SigningKey& signer, SignatureDigest digest) {
-    if (EVP_PKEY_is_a(signer.native(), "ED25519") == 1) return nullptr;
+const EVP_MD* messageDigest(SignatureDigest digest) {
     switch (digest) {
         case SignatureDigest::md5:
             return EVP_md5();
@@ -189,6 +188,7 @@ void addExtensions(X509* certificate, const CertificateFields& fields, const std
     addNamedExtension(certificate, NID_key_usage, fields.keyUsage);
     addNamedExtension(certificate, NID_ext_key_usage, fields.extendedKeyUsage);
     addNamedExtension(certificate, NID_subject_alt_name, fields.subjectAlternativeNames);
+    addNamedExtension(certificate, NID_name_constraints, fields.nameConstraints);
     if (subjectId) addExtension(certificate, {"2.5.29.14", false, shortElement(0x04, *subjectId)});
     if (authorityId) {
         addExtension(certificate, {"2.5.29.35", false, shortElement(0x30, shortElement(0x80, *authorityId))});
@@ -197,11 +197,103 @@ void addExtensions(X509* certificate, const CertificateFields& fields, const std
     for (const ExtensionField& extension : fields.extensions) addExtension(certificate, extension);
 }
 
+/// A context that signs as the fields say. `choices` belongs to it.
+DigestHandle signingContext(const SigningKey& signer, const CertificateFields& fields) {
+    const bool choosesDigest = EVP_PKEY_is_a(signer.native(), "ED25519") != 1;
+    const EVP_MD* const digest =
+        fields.pss ? messageDigest(fields.pss->digest) : messageDigest(fields.digest);
+    DigestHandle context(EVP_MD_CTX_new());
+    EVP_PKEY_CTX* choices = nullptr;
+    require(context && EVP_DigestSignInit(context.get(), &choices, choosesDigest ? digest : nullptr, nullptr,
+                                          signer.native()) == 1,
+            "signing");
+    if (fields.pss) {
+        require(EVP_PKEY_CTX_set_rsa_padding(choices, RSA_PKCS1_PSS_PADDING) == 1 &&
+                    EVP_PKEY_CTX_set_rsa_mgf1_md(choices, messageDigest(fields.pss->mask)) == 1 &&
+                    EVP_PKEY_CTX_set_rsa_pss_saltlen(choices, RSA_PSS_SALTLEN_DIGEST) == 1,
+                "PSS");
+    }
+    return context;
+}
+
+void sign(X509* certificate, const SigningKey& signer, const CertificateFields& fields) {
+    require(X509_sign_ctx(certificate, signingContext(signer, fields).get()) > 0, "signing");
+}
+
+Data joined(std::initializer_list<Data> parts) {
+    ByteWriter writer;
+    for (const Data& part : parts) writer.bytes(part);
+    return std::move(writer).take();
+}
+
+constexpr int kOrdinaryVersion = 3;
+
+/// The certificate after the edit, under a signature that is as good as before.
+Data edited(const Data& der, const CertificateFields& fields, const SigningKey& signer) {
+    CertificateElements all = takeApart(der);
+    if (fields.version != kOrdinaryVersion) {
+        const auto number = static_cast<std::uint8_t>(fields.version - 1);
+        all.version =
+            fields.version == 1 ? Data{} : derElement(0xA0, derElement(0x02, ByteWriter().u8(number).data()));
+        if (trust::der::readElement(all.extensions)->contents.size() <= 2) all.extensions.clear();
+    }
+    if (fields.edit) fields.edit(all);
+    const Data body = derElement(0x30, joined({all.version, all.serialNumber, all.innerAlgorithm, all.issuer,
+                                               all.validity, all.subject, all.key, all.issuerUniqueIdentifier,
+                                               all.subjectUniqueIdentifier, all.extensions}));
+    if (!all.signature) {
+        const DigestHandle context = signingContext(signer, fields);
+        std::size_t size = 0;
+        require(EVP_DigestSign(context.get(), nullptr, &size, unsignedBytes(body.data()), body.size()) == 1,
+                "signing");
+        Data bits(size);
+        require(EVP_DigestSign(context.get(), unsignedBytes(bits.data()), &size, unsignedBytes(body.data()),
+                               body.size()) == 1,
+                "signing");
+        bits.resize(size);
+        all.signature = derElement(0x03, ByteWriter().u8(0).bytes(bits).data());
+    }
+    return derElement(0x30, joined({body, all.outerAlgorithm, *all.signature}));
+}
+
 }  // namespace
+
+CertificateElements takeApart(ByteView certificate) {
+    const auto whole = trust::der::readElement(certificate);
+    require(whole.has_value(), "no certificate");
+    ByteView rest = whole->contents;
+    const auto take = [&rest] {
+        const auto element = trust::der::readElement(rest);
+        require(element.has_value(), "a part of the certificate is missing");
+        rest = rest.subspan(element->whole.size());
+        return foundation::toData(element->whole);
+    };
+    const auto takeIf = [&](std::uint8_t tag) {
+        return !rest.empty() && rest.front() == std::byte{tag} ? take() : Data{};
+    };
+    const Data body = take();
+    CertificateElements all;
+    all.outerAlgorithm = take();
+    rest = trust::der::readElement(body)->contents;
+    all.version = takeIf(0xA0);
+    for (Data* part :
+         {&all.serialNumber, &all.innerAlgorithm, &all.issuer, &all.validity, &all.subject, &all.key})
+        *part = take();
+    all.issuerUniqueIdentifier = takeIf(0x81);
+    all.subjectUniqueIdentifier = takeIf(0x82);
+    all.extensions = takeIf(0xA3);
+    return all;
+}
 
 SigningKey SigningKey::generate(KeyKind kind) {
     EVP_PKEY* const pair = generatePair(kind);
     require(pair != nullptr, "key generation failed");
+    return SigningKey(std::shared_ptr<EVP_PKEY>(pair, EVP_PKEY_free));
+}
+
+SigningKey SigningKey::onCurve(const char* curve) {
+    EVP_PKEY* const pair = EVP_EC_gen(curve);
+    require(pair != nullptr, curve);
     return SigningKey(std::shared_ptr<EVP_PKEY>(pair, EVP_PKEY_free));
 }
 
@@ -255,7 +347,7 @@ IssuedCertificate issueCertificate(const CertificateFields& fields, const Issued
     const DistinguishedName& issuerName = issuer != nullptr ? issuer->subject : fields.subject;
     const SigningKey signer = fields.signer.value_or(issuer != nullptr ? issuer->key : fields.key);
 
-    require(X509_set_version(certificate.get(), fields.version - 1) == 1, "version");
+    require(X509_set_version(certificate.get(), X509_VERSION_3) == 1, "version");
     require(ASN1_INTEGER_set_int64(X509_get_serialNumber(certificate.get()), fields.serial) == 1, "serial");
     require(X509_set_subject_name(certificate.get(), makeName(fields.subject).get()) == 1, "subject");
     require(X509_set_issuer_name(certificate.get(), makeName(fields.issuer.value_or(issuerName)).get()) == 1,
@@ -270,9 +362,9 @@ IssuedCertificate issueCertificate(const CertificateFields& fields, const Issued
     const std::optional<Data> issuerId = issuer != nullptr ? issuer->subjectKeyIdentifier : subjectId;
     addExtensions(certificate.get(), fields, subjectId, resolve(fields.authorityKeyIdentifier, issuerId));
 
-    require(X509_sign(certificate.get(), signer.native(), messageDigest(signer, fields.digest)) > 0,
-            "signing");
+    sign(certificate.get(), signer, fields);
     IssuedCertificate issued{encoded(certificate.get(), i2d_X509), fields.key, fields.subject, subjectId};
+    if (fields.edit || fields.version != kOrdinaryVersion) issued.der = edited(issued.der, fields, signer);
     if (fields.corruptSignature) issued.der.back() ^= std::byte{1};
     return issued;
 }

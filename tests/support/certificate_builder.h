@@ -9,6 +9,7 @@
 // Every function throws std::runtime_error when OpenSSL refuses; a test needs no check of its own.
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -45,6 +46,9 @@ class SigningKey {
     /// default, and the way to have RSA keys without waiting for one at every turn. May be called from any
     /// thread.
     static SigningKey cached(KeyKind kind, const std::string& name);
+
+    /// On the curve of that name, of OpenSSL's. A key pair of its own.
+    static SigningKey onCurve(const char* curve);
 
     /// PKCS #8, unencrypted.
     std::string pem() const;
@@ -86,6 +90,12 @@ struct ExtensionField {
 /// MD5 goes with an RSA issuer only: ECDSA has no identifier for it.
 enum class SignatureDigest { md5, sha1, sha256, sha384 };
 
+/// Of an RSASSA-PSS signature.
+struct PssDigests {
+    SignatureDigest digest = SignatureDigest::sha256;
+    SignatureDigest mask = SignatureDigest::sha256;
+};
+
 /// What becomes of a key identifier extension.
 struct KeyIdentifier {
     enum class Kind { computed, omitted, given };
@@ -95,6 +105,26 @@ struct KeyIdentifier {
     static KeyIdentifier omitted() { return {Kind::omitted}; }
     static KeyIdentifier given(std::string_view bytes) { return {Kind::given, foundation::toData(bytes)}; }
 };
+
+/// What a certificate is put together from, each an encoded element; an empty one is left out. What the
+/// fields cannot say, since OpenSSL does not write it, an edit of these does.
+struct CertificateElements {
+    foundation::Data version;  // [0] and what is in it
+    foundation::Data serialNumber;
+    foundation::Data innerAlgorithm;
+    foundation::Data issuer;
+    foundation::Data validity;
+    foundation::Data subject;
+    foundation::Data key;
+    foundation::Data issuerUniqueIdentifier;   // [1]
+    foundation::Data subjectUniqueIdentifier;  // [2]
+    foundation::Data extensions;               // [3] and what is in it
+    foundation::Data outerAlgorithm;
+    std::optional<foundation::Data> signature = std::nullopt;  // a BIT STRING; made anew unless given
+};
+
+/// Takes an issued certificate apart; its signature is left out.
+CertificateElements takeApart(foundation::ByteView certificate);
 
 /// All that goes into a certificate but its issuer. Extensions are written in the order of the members.
 struct CertificateFields {
@@ -111,6 +141,7 @@ struct CertificateFields {
     std::string keyUsage = {};          // as in openssl.cnf: "critical,keyCertSign,cRLSign"; empty: none
     std::string extendedKeyUsage = {};  // as in openssl.cnf: "serverAuth,1.2.3.4"; empty: none
     std::string subjectAlternativeNames = {};  // as in openssl.cnf: "DNS:a.example,IP:127.0.0.1"; empty: none
+    std::string nameConstraints = {};          // as in openssl.cnf: "permitted;DNS:a.example"; empty: none
     KeyIdentifier subjectKeyIdentifier = {};   // computed: SHA-1 of the public key
     KeyIdentifier authorityKeyIdentifier =
         {};                                 // computed: the issuer's subject key identifier, when it has one
@@ -120,6 +151,8 @@ struct CertificateFields {
     SignatureDigest digest = SignatureDigest::sha256;
     std::optional<SigningKey> signer = std::nullopt;  // the issuing certificate's key unless said otherwise
     bool corruptSignature = false;                    // flips the last bit of the finished certificate
+    std::function<void(CertificateElements&)> edit = nullptr;  // before it is signed, whatever comes of it
+    std::optional<PssDigests> pss = std::nullopt;              // an RSA signer signs by RSASSA-PSS
 };
 
 /// A certificate and what it takes to issue others with it.
