@@ -17,7 +17,7 @@ trust::PolicyRef initialPolicy(const std::string& host) {
     policy.options.emplace(option::kHostName, host);
     policy.options.emplace(option::kPlatformAnchor, foundation::Dictionary{});
     for (const auto check : {option::kServerAuthentication, option::kValidityDates, option::kBasicConstraints,
-                             option::kCriticalExtensions, option::kIdLinkage})
+                             option::kNameConstraints, option::kCriticalExtensions, option::kIdLinkage})
         policy.options.emplace(check, true);
     return std::make_shared<const trust::Policy>(std::move(policy));
 }

@@ -1,33 +1,16 @@
 #include "trust/anchors.h"
 
-#include <openssl/pem.h>
-
 #include <algorithm>
-#include <string_view>
 
-#include "trust/openssl.h"
+#include "foundation/format.h"
+#include "trust/byte_text.h"
+#include "trust/pem.h"
 
 namespace pinwell::trust {
 namespace {
 
-using BioHandle = Handle<BIO, BIO_free_all>;
-
-/// What PEM_read_bio allocates for one block.
-struct PemBlock {
-    char* name = nullptr;
-    char* header = nullptr;
-    unsigned char* data = nullptr;
-    long length = 0;
-
-    PemBlock() = default;
-    PemBlock(const PemBlock&) = delete;
-    PemBlock& operator=(const PemBlock&) = delete;
-    ~PemBlock() {
-        OPENSSL_free(name);
-        OPENSSL_free(header);
-        OPENSSL_free(data);
-    }
-};
+/// Lines for one file; what is damaged beyond that is counted.
+constexpr std::size_t kMaximumReports = 16;
 
 }  // namespace
 
@@ -36,32 +19,43 @@ bool contains(const CertificateList& list, const X509Certificate& certificate) {
                        [&](const X509CertificateRef& entry) { return entry->der() == certificate.der(); });
 }
 
-bool isDistrusted(const X509Certificate& certificate, const CertificateList& denied) {
-    return std::any_of(denied.begin(), denied.end(), [&](const X509CertificateRef& entry) {
-        // A key that cannot be read is like no other; such a certificate is known by what it says.
-        return entry->saysTheSameAs(certificate) || entry->hasSameSubjectAndKeyAs(certificate);
-    });
-}
-
 std::optional<CertificateList> readPem(ByteView text) {
     if (text.size() > kMaximumPemFileSize) return std::nullopt;
-    const ErrorQueueGuard guard;
-    const BioHandle bio(BIO_new_mem_buf(text.data(), static_cast<int>(text.size())));
-    if (!bio) return std::nullopt;
     CertificateList certificates;
-    for (;;) {
-        PemBlock block;
-        if (PEM_read_bio(bio.get(), &block.name, &block.header, &block.data, &block.length) != 1) break;
-        if (std::string_view(block.name) != PEM_STRING_X509) continue;
-        X509CertificateRef certificate =
-            X509Certificate::parse(byteView(block.data, static_cast<int>(block.length)));
+    for (const PemBlock& block : readPemBlocks(asText(text))) {
+        if (!block.data) return std::nullopt;
+        if (!isCertificateBlock(block)) continue;
+        X509CertificateRef certificate = X509Certificate::parse(*block.data);
         if (!certificate || certificates.size() == kMaximumCertificatesPerFile) return std::nullopt;
         certificates.push_back(std::move(certificate));
     }
-    // The end of the text shows as a block that has no first line; anything else is a broken block.
-    const bool atEnd = ERR_GET_REASON(ERR_peek_last_error()) == PEM_R_NO_START_LINE;
-    if (!atEnd || certificates.empty()) return std::nullopt;
+    if (certificates.empty()) return std::nullopt;
     return certificates;
+}
+
+void readDeniedPem(ByteView text, DenyList& into, const std::function<void(const std::string&)>& report) {
+    std::size_t certificates = 0;
+    std::size_t damaged = 0;
+    for (const PemBlock& block : readPemBlocks(asText(text))) {
+        std::string_view damage = block.damage;
+        if (block.data) {
+            // What OpenSSL writes as "trusted" is a certificate with more behind it.
+            if (!isCertificateBlock(block) && block.label != "TRUSTED CERTIFICATE") continue;
+            if (X509CertificateRef certificate = X509Certificate::parse(*block.data)) {
+                into.add(certificate);
+                ++certificates;
+                continue;
+            }
+            const bool hasKey = into.addUnreadable(*block.data);
+            damage = hasKey ? "it is no proper certificate; its key is distrusted all the same"
+                            : "it is no certificate";
+        }
+        if (++damaged <= kMaximumReports)
+            report(foundation::format("the block at line %zu: %@", block.line, std::string(damage)));
+    }
+    if (damaged > kMaximumReports)
+        report(foundation::format("%zu more blocks are damaged", damaged - kMaximumReports));
+    if (certificates == 0 && damaged == 0) report("not a PEM file of certificates");
 }
 
 }  // namespace pinwell::trust

@@ -1,37 +1,19 @@
-// A parsed certificate with all that chains and checks ask of it. OpenSSL reads it; nothing of OpenSSL is
-// seen here.
+// A parsed certificate with all that chains and checks ask of it.
 #pragma once
 
 #include <memory>
+#include <mutex>
 #include <string>
-#include <string_view>
 
+#include "trust/certificate_grammar.h"
+#include "trust/distinguished_name.h"
 #include "trust/extensions.h"
+#include "trust/public_key.h"
 #include "trust/trust.h"
-
-struct evp_pkey_st;  // OpenSSL's EVP_PKEY
 
 namespace pinwell::trust {
 
-/// A longer certificate is refused. The same limit as that of a ticket's certificate element.
-inline constexpr std::size_t kMaximumCertificateSize = 131072;
-
-/// A key of a kind that OpenSSL knows, on a named curve when it is an elliptic-curve one.
-class X509PublicKey final : public PublicKey {
-  public:
-    explicit X509PublicKey(std::shared_ptr<evp_pkey_st> key) : key_(std::move(key)) {}
-
-    evp_pkey_st* native() const noexcept { return key_.get(); }
-
-    /// kKeyTypeRSA, kKeyTypeEllipticCurve, or empty for any other kind.
-    std::string_view type() const;
-    int bits() const;
-
-  private:
-    std::shared_ptr<evp_pkey_st> key_;
-};
-
-/// Everything is read when it is made, so that any number of threads may ask afterwards.
+/// Everything but the key that verifies is read when it is made; any number of threads may ask afterwards.
 class X509Certificate final : public Certificate {
   public:
     /// Null unless `der` is exactly one well-formed certificate of at most kMaximumCertificateSize bytes.
@@ -41,45 +23,54 @@ class X509Certificate final : public Certificate {
     std::string subjectSummary() const override { return summary_; }
 
     const CertificateExtensions& extensions() const noexcept { return extensions_; }
-    Date notBefore() const noexcept { return notBefore_; }
-    Date notAfter() const noexcept { return notAfter_; }
-    bool hasEmptySubject() const noexcept { return emptySubject_; }
+    Date notBefore() const noexcept { return parts_.notBefore; }
+    Date notAfter() const noexcept { return parts_.notAfter; }
+    bool hasEmptySubject() const noexcept { return subject_.isEmpty; }
+
+    const DistinguishedName& subject() const noexcept { return subject_; }
+    const DistinguishedName& issuer() const noexcept { return issuer_; }
+    const SignatureAlgorithm& signatureAlgorithm() const noexcept { return algorithm_; }
+    const SubjectKey& subjectKey() const noexcept { return subjectKey_; }
+
+    /// Views into `der`.
+    const CertificateParts& parts() const noexcept { return parts_; }
 
     /// Whether subject and issuer are the same name. Says nothing about the signature.
-    bool isSelfIssued() const noexcept { return selfIssued_; }
+    bool isSelfIssued() const noexcept { return subject_.canonical == issuer_.canonical; }
 
-    /// Null when OpenSSL cannot read it, or it brings its own curve instead of naming one.
-    const std::shared_ptr<const X509PublicKey>& publicKey() const noexcept { return publicKey_; }
+    /// Null if it cannot be used: `readSubjectKey` says when, and a point may not be on its curve.
+    const std::shared_ptr<const X509PublicKey>& publicKey() const;
 
     /// Whether the signature rests on a digest that is not known to be sound.
-    bool hasWeakSignatureDigest() const noexcept { return weakDigest_; }
+    bool hasWeakSignatureDigest() const noexcept { return algorithm_.isWeak(); }
 
     bool isNamedAsIssuerOf(const X509Certificate& other) const;
 
-    /// Whether this certificate's key verifies the other's signature.
+    /// Whether this certificate's key verifies the other's signature. Not if the other names one algorithm
+    /// inside and another outside.
     bool verifiesSignatureOf(const X509Certificate& other) const;
-
-    /// Whether both say the same, byte for byte (tbsCertificate, RFC 5280, 4.1.1.1), whatever their
-    /// signatures are.
-    bool saysTheSameAs(const X509Certificate& other) const;
 
     /// Whether both are about the same subject and the same key, however they differ otherwise.
     bool hasSameSubjectAndKeyAs(const X509Certificate& other) const;
 
   private:
-    explicit X509Certificate(std::shared_ptr<x509_st> certificate, Data der)
-        : certificate_(std::move(certificate)), der_(std::move(der)) {}
+    explicit X509Certificate(Data der) : der_(std::move(der)) {}
 
-    std::shared_ptr<x509_st> certificate_;
+    void read();
+
     Data der_;
-    std::string summary_;
+    CertificateParts parts_;
+    DistinguishedName subject_;
+    DistinguishedName issuer_;
+    SignatureAlgorithm algorithm_;
+    SubjectKey subjectKey_;
     CertificateExtensions extensions_;
-    Date notBefore_;
-    Date notAfter_;
-    bool emptySubject_ = false;
-    bool selfIssued_ = false;
-    bool weakDigest_ = true;
-    std::shared_ptr<const X509PublicKey> publicKey_;
+    std::string summary_;
+    bool algorithmsAgree_ = false;
+
+    // Made when it is first asked for: of a thousand anchors, a chain needs one.
+    mutable std::once_flag keyMade_;
+    mutable std::shared_ptr<const X509PublicKey> publicKey_;
 };
 using X509CertificateRef = std::shared_ptr<const X509Certificate>;
 

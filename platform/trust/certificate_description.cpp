@@ -9,45 +9,59 @@
 namespace pinwell::trust {
 namespace {
 
-using BignumHandle = Handle<BIGNUM, BN_free>;
 using BioHandle = Handle<BIO, BIO_free_all>;
-using X509Handle = Handle<X509, X509_free>;
+using NameHandle = Handle<X509_NAME, X509_NAME_free>;
+using ObjectHandle = Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
 
-std::string nameText(const X509_NAME* name) {
+/// Of a name that `readName` has read, so that its parts are well-formed and bounded in number.
+std::string nameText(const der::Element& encoded) {
+    const unsigned char* at = unsignedBytes(encoded.whole);
+    const NameHandle name(d2i_X509_NAME(nullptr, &at, static_cast<long>(encoded.whole.size())));
     const BioHandle text(BIO_new(BIO_s_mem()));
     // UTF-8 stays readable; what could drive a terminal does not get through.
     const unsigned long flags = (XN_FLAG_RFC2253 & ~ASN1_STRFLGS_ESC_MSB) | ASN1_STRFLGS_ESC_CTRL;
-    if (!text || X509_NAME_print_ex(text.get(), name, 0, flags) < 0) return {};
+    if (!name || !text || X509_NAME_print_ex(text.get(), name.get(), 0, flags) < 0) return {};
     char* bytes = nullptr;
     const long length = BIO_get_mem_data(text.get(), &bytes);
     return length > 0 ? std::string(bytes, static_cast<std::size_t>(length)) : std::string();
 }
 
-std::string serialText(const X509* certificate) {
-    const BignumHandle number(ASN1_INTEGER_to_BN(X509_get0_serialNumber(certificate), nullptr));
-    if (!number) return {};
-    std::string text(BN_is_negative(number.get()) == 1 ? "-" : "");
-    foundation::Data bytes(static_cast<std::size_t>(BN_num_bytes(number.get())));
-    if (bytes.empty()) return "00";
-    BN_bn2bin(number.get(), static_cast<unsigned char*>(static_cast<void*>(bytes.data())));
-    return text + foundation::toHex(bytes);
+/// The magnitude of a number in two's complement.
+foundation::Data negated(foundation::ByteView number) {
+    foundation::Data result = foundation::toData(number);
+    bool carry = true;
+    for (auto byte = result.rbegin(); byte != result.rend(); ++byte) {
+        *byte = ~*byte;
+        if (!carry) continue;
+        *byte = static_cast<std::byte>(std::to_integer<unsigned>(*byte) + 1U);
+        carry = *byte == std::byte{0};
+    }
+    return result;
 }
 
-foundation::Data fingerprint(const X509* certificate, const EVP_MD* digest) {
+/// Of the contents of an INTEGER, which are not empty.
+std::string serialText(foundation::ByteView number) {
+    const bool isNegative = (number.front() & std::byte{0x80}) != std::byte{0};
+    const foundation::Data magnitude = isNegative ? negated(number) : foundation::toData(number);
+    const auto first =
+        std::find_if(magnitude.begin(), magnitude.end(), [](std::byte byte) { return byte != std::byte{0}; });
+    if (first == magnitude.end()) return "00";
+    return (isNegative ? "-" : "") + foundation::toHex({first, magnitude.end()});
+}
+
+foundation::Data fingerprint(foundation::ByteView der, const EVP_MD* digest) {
     std::array<unsigned char, EVP_MAX_MD_SIZE> bytes{};
     unsigned length = 0;
-    if (X509_digest(certificate, digest, bytes.data(), &length) != 1) return {};
+    if (EVP_Digest(der.data(), der.size(), bytes.data(), &length, digest, nullptr) != 1) return {};
     return foundation::toData(byteView(bytes.data(), static_cast<int>(length)));
 }
 
-std::string algorithmText(const X509* certificate) {
-    const X509_ALGOR* algorithm = nullptr;
-    X509_get0_signature(nullptr, &algorithm, certificate);
-    const ASN1_OBJECT* oid = nullptr;
-    X509_ALGOR_get0(&oid, nullptr, nullptr, algorithm);
-    std::array<char, 128> text{};
-    const int length = OBJ_obj2txt(text.data(), static_cast<int>(text.size()), oid, 0);
-    return length > 0 ? std::string(text.data()) : std::string();
+/// OpenSSL's long name of an identifier, which is bounded; the identifier itself where it has none.
+std::string oidName(const std::string& oid) {
+    const ObjectHandle object(OBJ_txt2obj(oid.c_str(), 1));
+    const int number = object ? OBJ_obj2nid(object.get()) : NID_undef;
+    const char* const name = number == NID_undef ? nullptr : OBJ_nid2ln(number);
+    return name == nullptr ? oid : name;
 }
 
 void describeKey(const X509Certificate& certificate, CertificateDescription& into) {
@@ -58,13 +72,8 @@ void describeKey(const X509Certificate& certificate, CertificateDescription& int
         const char* const name = EVP_PKEY_get0_type_name(key->native());
         into.keyType = name == nullptr ? "unknown" : name;
     }
-    into.keyBits = key->bits();
-    if (key->type() != kKeyTypeEllipticCurve) return;
-    std::array<char, 64> curve{};
-    std::size_t length = 0;
-    if (EVP_PKEY_get_group_name(key->native(), curve.data(), curve.size(), &length) == 1) {
-        into.curve.assign(curve.data(), std::min(length, curve.size() - 1));
-    }
+    into.keyBits = static_cast<int>(key->bits());
+    into.curve = key->curve();
 }
 
 void describeExtensions(const CertificateExtensions& extensions, CertificateDescription& into) {
@@ -85,23 +94,20 @@ std::optional<CertificateDescription> describeCertificate(foundation::ByteView d
     const X509CertificateRef certificate = X509Certificate::parse(der);
     if (certificate == nullptr) return std::nullopt;
     const ErrorQueueGuard guard;
-    const unsigned char* at = unsignedBytes(der);
-    const X509Handle parsed(d2i_X509(nullptr, &at, static_cast<long>(der.size())));
-    if (!parsed) return std::nullopt;
-
+    const CertificateParts& parts = certificate->parts();
     CertificateDescription description;
-    description.subject = nameText(X509_get_subject_name(parsed.get()));
-    description.issuer = nameText(X509_get_issuer_name(parsed.get()));
+    description.subject = nameText(parts.subject);
+    description.issuer = nameText(parts.issuer);
     description.summary = certificate->subjectSummary();
-    description.serialNumber = serialText(parsed.get());
+    description.serialNumber = serialText(parts.serialNumber);
     description.notBefore = certificate->notBefore();
     description.notAfter = certificate->notAfter();
     describeKey(*certificate, description);
-    description.signatureAlgorithm = algorithmText(parsed.get());
+    description.signatureAlgorithm = oidName(certificate->signatureAlgorithm().oid);
     description.isSelfIssued = certificate->isSelfIssued();
     describeExtensions(certificate->extensions(), description);
-    description.sha1Fingerprint = fingerprint(parsed.get(), EVP_sha1());
-    description.sha256Fingerprint = fingerprint(parsed.get(), EVP_sha256());
+    description.sha1Fingerprint = fingerprint(der, EVP_sha1());
+    description.sha256Fingerprint = fingerprint(der, EVP_sha256());
     return description;
 }
 

@@ -2,6 +2,8 @@
 
 #include <algorithm>
 
+#include "trust/byte_text.h"
+
 namespace pinwell::trust {
 namespace {
 
@@ -14,80 +16,126 @@ int identifierPreference(const X509Certificate& issuer, const X509Certificate& i
     return *wanted == *present ? identifierFits : identifierDiffers;
 }
 
-}  // namespace
-
-ChainBuilder::ChainBuilder(const CertificateList& given, const CertificateList& platformAnchors,
-                           const Anchors& anchors)
-    : platformAnchors_(platformAnchors), anchors_(anchors), leaf_(given.front()) {
-    const auto add = [this](const CertificateList& list) {
-        for (const X509CertificateRef& certificate : list) {
-            if (!contains(candidates_, *certificate)) candidates_.push_back(certificate);
-        }
-    };
-    add(platformAnchors);
-    add(anchors.allowed);
-    add(given);
-    // A chain whose distrusted root was left out of the list is a chain with a distrusted root all the same.
-    add(anchors.denied);
+std::unordered_set<std::string_view> bytesOf(const CertificateList& list) {
+    std::unordered_set<std::string_view> bytes;
+    for (const X509CertificateRef& certificate : list) bytes.insert(asText(certificate->der()));
+    return bytes;
 }
 
-void ChainBuilder::build(const std::function<bool(const CandidateChain&)>& visit) {
+bool contains(const std::unordered_set<std::string_view>& bytes, const X509Certificate& certificate) {
+    return bytes.contains(asText(certificate.der()));
+}
+
+/// Whether the chain holds the certificate, or another of its subject and key.
+bool repeats(const CertificateList& chain, const X509Certificate& candidate) {
+    return std::any_of(chain.begin(), chain.end(), [&](const X509CertificateRef& member) {
+        return member->der() == candidate.der() || member->hasSameSubjectAndKeyAs(candidate);
+    });
+}
+
+}  // namespace
+
+std::optional<bool> SignatureChecks::verifies(const X509CertificateRef& issuer,
+                                              const X509CertificateRef& issued) {
+    const std::pair pair(issuer, issued);
+    const auto known = made_.find(pair);
+    if (known != made_.end()) return known->second;
+    if (made_.size() >= kMaximumSignatureChecks) return std::nullopt;
+    return made_.emplace(pair, issuer->verifiesSignatureOf(*issued)).first->second;
+}
+
+ChainBuilder::ChainBuilder(const CertificateList& given, const CertificateList& platformAnchors,
+                           const Anchors& anchors, SignatureChecks& checks)
+    : anchors_(anchors),
+      checks_(checks),
+      platformAnchors_(bytesOf(platformAnchors)),
+      allowed_(bytesOf(anchors.allowed)),
+      leaf_(given.front()) {
+    addCandidates(platformAnchors);
+    addCandidates(anchors.allowed);
+    addCandidates(given);
+    // A chain whose distrusted root was left out of the list is a chain with a distrusted root all the same.
+    addCandidates(anchors.denied.certificates());
+}
+
+void ChainBuilder::addCandidates(const CertificateList& list) {
+    for (const X509CertificateRef& certificate : list) {
+        if (known_.insert(asText(certificate->der())).second)
+            candidates_[asText(certificate->subject().canonical)].push_back(certificate);
+    }
+}
+
+void ChainBuilder::build(const Visit& visit) {
     CertificateList chain{leaf_};
     extend(chain, visit);
 }
 
-/// Answers whether the search is over.
-bool ChainBuilder::extend(CertificateList& chain, const std::function<bool(const CandidateChain&)>& visit) {
-    const auto show = [&] {
-        ++shown_;
-        return visit(describe(chain)) || shown_ >= kMaximumChains;
-    };
-    const bool canEnd =
-        contains(platformAnchors_, *chain.back()) || contains(anchors_.allowed, *chain.back());
-    if (canEnd && show()) return true;
-    const std::vector<Issuer> issuers =
-        chain.size() < kMaximumChainLength ? issuersFor(chain) : std::vector<Issuer>{};
-    if (issuers.empty()) return !canEnd && show();
-    for (const Issuer& issuer : issuers) {
-        chain.push_back(issuer.certificate);
-        const bool over = extend(chain, visit);
-        chain.pop_back();
-        if (over) return true;
+/// Returns whether the search is over.
+bool ChainBuilder::show(const CertificateList& chain, const Visit& visit) {
+    if (shown_ == kMaximumChains) {
+        exhausted_ = true;
+        return true;
     }
-    return false;
+    ++shown_;
+    return visit(describe(chain));
 }
 
-/// Certificates that could stand next in the chain, best first. One whose key does not verify the signature
-/// is shown only when no certificate's key does, so that the chain can be seen with what is wrong in it; and
-/// not when its key identifier differs as well, for then it merely has the same name.
-std::vector<ChainBuilder::Issuer> ChainBuilder::issuersFor(const CertificateList& chain) {
-    const X509CertificateRef& issued = chain.back();
-    std::vector<Issuer> issuers;
+/// Returns whether the search is over. An issuer whose key does not verify the signature is shown only if no
+/// certificate's key does, so that the chain can be seen with what is wrong in it; and not if its key
+/// identifier differs as well, for then it merely has the same name.
+bool ChainBuilder::extend(CertificateList& chain, const Visit& visit) {
+    const X509CertificateRef issued = chain.back();
+    const bool canEnd = contains(platformAnchors_, *issued) || contains(allowed_, *issued);
+    if (canEnd && show(chain, visit)) return true;
+
+    const auto goTo = [&](const X509CertificateRef& issuer) {
+        chain.push_back(issuer);
+        const bool over = extend(chain, visit);
+        chain.pop_back();
+        return over;
+    };
+    const bool isLongest = chain.size() == kMaximumChainLength;
+    X509CertificateRef unverified;
+    CertificateList repeated;
     bool hasIssuer = false;
-    for (const X509CertificateRef& candidate : candidates_) {
-        if (!candidate->isNamedAsIssuerOf(*issued)) continue;
-        const Issuer issuer{candidate, verifies(candidate, issued),
-                            identifierPreference(*candidate, *issued)};
-        hasIssuer = hasIssuer || issuer.verifies;  // a self-signed certificate has one: itself
-        if (!issuer.verifies && issuer.preference == identifierDiffers) continue;
-        const bool repeats = std::any_of(chain.begin(), chain.end(), [&](const X509CertificateRef& member) {
-            return member->der() == candidate->der() || member->hasSameSubjectAndKeyAs(*candidate);
-        });
-        if (!repeats) issuers.push_back(issuer);
+    for (const X509CertificateRef& issuer : namedAs(*issued)) {
+        if (repeats(chain, *issuer)) {
+            repeated.push_back(issuer);
+        } else if (verifies(issuer, issued)) {
+            hasIssuer = true;
+            if (isLongest) break;
+            if (goTo(issuer)) return true;
+        } else if (!unverified && identifierPreference(*issuer, *issued) != identifierDiffers) {
+            unverified = issuer;
+        }
     }
-    if (hasIssuer) std::erase_if(issuers, [](const Issuer& issuer) { return !issuer.verifies; });
+    if (hasIssuer && isLongest) exhausted_ = true;
+    if (hasIssuer && !isLongest) return false;
+    // A self-signed certificate has an issuer: itself.
+    const bool wantsNone = hasIssuer || isLongest || !unverified ||
+                           std::any_of(repeated.begin(), repeated.end(),
+                                       [&](const X509CertificateRef& one) { return verifies(one, issued); });
+    if (!wantsNone) return goTo(unverified);
+    return !canEnd && show(chain, visit);
+}
+
+/// Certificates of the issuer's name, those whose key identifier fits first.
+CertificateList ChainBuilder::namedAs(const X509Certificate& issued) const {
+    const auto found = candidates_.find(asText(issued.issuer().canonical));
+    if (found == candidates_.end()) return {};
+    CertificateList issuers = found->second;
     std::stable_sort(issuers.begin(), issuers.end(),
-                     [](const Issuer& a, const Issuer& b) { return a.preference > b.preference; });
-    if (!hasIssuer && issuers.size() > 1) issuers.erase(issuers.begin() + 1, issuers.end());
+                     [&](const X509CertificateRef& a, const X509CertificateRef& b) {
+                         return identifierPreference(*a, issued) > identifierPreference(*b, issued);
+                     });
     return issuers;
 }
 
+/// What was not checked does not verify.
 bool ChainBuilder::verifies(const X509CertificateRef& issuer, const X509CertificateRef& issued) {
-    const std::pair pair(issuer.get(), issued.get());
-    const auto known = checkedSignatures_.find(pair);
-    if (known != checkedSignatures_.end()) return known->second;
-    if (checkedSignatures_.size() >= kMaximumSignatureChecks) return false;
-    return checkedSignatures_.emplace(pair, issuer->verifiesSignatureOf(*issued)).first->second;
+    const std::optional<bool> result = checks_.verifies(issuer, issued);
+    if (!result) exhausted_ = true;
+    return result.value_or(false);
 }
 
 CandidateChain ChainBuilder::describe(const CertificateList& chain) {
@@ -95,8 +143,8 @@ CandidateChain ChainBuilder::describe(const CertificateList& chain) {
     for (std::size_t i = 0; i < chain.size(); ++i) {
         if (!result.badSignature && i + 1 < chain.size() && !verifies(chain[i + 1], chain[i]))
             result.badSignature = i;
-        if (!result.denied && isDistrusted(*chain[i], anchors_.denied)) result.denied = i;
-        if (contains(anchors_.allowed, *chain[i])) result.anchoring = Anchoring::user;
+        if (!result.denied && anchors_.denied.reaches(*chain[i])) result.denied = i;
+        if (contains(allowed_, *chain[i])) result.anchoring = Anchoring::user;
     }
     if (contains(platformAnchors_, *chain.back())) result.anchoring = Anchoring::platform;
     return result;

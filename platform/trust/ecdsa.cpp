@@ -12,9 +12,11 @@ namespace {
 using DigestContext = Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
 
 constexpr std::uint8_t kSignBit = 0x80;
+constexpr std::size_t kLongestInteger = 67;  // the order of P-521 has 66 bytes, a positive integer one more
 
 bool isPositiveInteger(const der::Element& element) {
-    if (element.tag != der::kInteger || element.contents.empty()) return false;
+    if (element.tag != der::kInteger || element.contents.empty() || element.contents.size() > kLongestInteger)
+        return false;
     foundation::ByteReader reader(element.contents);
     const std::uint8_t first = reader.u8("integer");
     if (first != 0) return (first & kSignBit) == 0;
@@ -38,6 +40,10 @@ ByteView signatureElement(ByteView field) {
 }
 
 }  // namespace
+
+bool isStrictEcdsaSignature(ByteView signature) {
+    return !signature.empty() && signatureElement(signature).size() == signature.size();
+}
 
 bool verifyEcdsa(const X509PublicKey& key, ByteView message, ByteView field) {
     if (key.type() != kKeyTypeEllipticCurve) return false;

@@ -1,4 +1,4 @@
-// ECDSA signatures in a fixed-size field.
+// ECDSA signatures: their form, and those in a fixed-size field.
 //
 //   SEQUENCE { INTEGER r, INTEGER s }   X9.62 form, strict DER (RFC 3279, 2.2.3)
 //   zero bytes                          up to the end of the field
@@ -7,9 +7,12 @@
 // anything in the sequence behind the second, and a non-zero byte behind the sequence.
 #pragma once
 
-#include "trust/certificate.h"
+#include "trust/public_key.h"
 
 namespace pinwell::trust {
+
+/// Whether it is the sequence above, with nothing behind it.
+bool isStrictEcdsaSignature(ByteView signature);
 
 /// Over SHA-256 of the message. A key that is not on an elliptic curve verifies nothing.
 bool verifyEcdsa(const X509PublicKey& key, ByteView message, ByteView field);

@@ -4,12 +4,14 @@
 #include <array>
 #include <set>
 
-#include "trust/der.h"
-#include "trust/openssl.h"
+#include "trust/der_cursor.h"
 
 namespace pinwell::trust {
 namespace {
 
+using der::Cursor;
+using der::Element;
+using der::Malformed;
 using foundation::ByteView;
 using foundation::Data;
 
@@ -17,113 +19,125 @@ constexpr std::string_view kSubjectKeyIdentifierOid = "2.5.29.14";
 constexpr std::string_view kKeyUsageOid = "2.5.29.15";
 constexpr std::string_view kAlternativeNamesOid = "2.5.29.17";
 constexpr std::string_view kBasicConstraintsOid = "2.5.29.19";
+constexpr std::string_view kCertificatePoliciesOid = "2.5.29.32";
 constexpr std::string_view kAuthorityKeyIdentifierOid = "2.5.29.35";
 constexpr std::string_view kPurposesOid = "2.5.29.37";
 
-std::string dottedOid(const ASN1_OBJECT* object) {
-    std::array<char, 128> text{};
-    const int length = OBJ_obj2txt(text.data(), static_cast<int>(text.size()), object, 1);
-    if (length <= 0) return {};
-    if (static_cast<std::size_t>(length) < text.size())
-        return {text.data(), static_cast<std::size_t>(length)};
-    std::string whole(static_cast<std::size_t>(length) + 1, '\0');
-    OBJ_obj2txt(whole.data(), length + 1, object, 1);
-    whole.pop_back();
-    return whole;
+constexpr std::string_view kServerAuthenticationPurpose = "1.3.6.1.5.5.7.3.1";
+constexpr std::string_view kAnyPurpose = "2.5.29.37.0";
+
+/// The contents of the one SEQUENCE that fills the value.
+Cursor enterSequence(ByteView value) {
+    Cursor outer(value);
+    const Cursor inner = outer.enter(der::kConstructedSequence);
+    outer.expectEnd();
+    return inner;
 }
 
-/// The extension decoded by OpenSSL; null when it cannot be, or when bytes follow its value, which OpenSSL
-/// ignores.
-template <class T, auto release>
-Handle<T, release> decode(X509_EXTENSION* extension) {
-    const ByteView value = byteView(X509_EXTENSION_get_data(extension));
-    const std::optional<der::Element> element = der::readElement(value);
-    if (!element || element->whole.size() != value.size()) return nullptr;
-    return Handle<T, release>(static_cast<T*>(X509V3_EXT_d2i(extension)));
-}
-
-bool readBasicConstraints(X509_EXTENSION* extension, CertificateExtensions& into) {
-    const auto decoded = decode<BASIC_CONSTRAINTS, BASIC_CONSTRAINTS_free>(extension);
-    if (!decoded) return false;
-    BasicConstraints constraints{decoded->ca != 0, std::nullopt};
-    if (decoded->pathlen != nullptr) {
-        std::uint64_t length = 0;
-        if (ASN1_INTEGER_get_uint64(&length, decoded->pathlen) != 1)
-            return false;  // negative, or out of range
-        constraints.pathLength = length;
+void readBasicConstraints(ByteView value, CertificateExtensions& into) {
+    Cursor fields = enterSequence(value);
+    BasicConstraints constraints;
+    if (!fields.atEnd() && der::readElement(fields.rest())->tag == der::kBoolean)
+        constraints.isCertificateAuthority = fields.boolean();
+    if (!fields.atEnd()) {
+        const ByteView length = fields.naturalNumber();
+        if (length.size() > sizeof(std::uint64_t)) throw Malformed("a path length is out of range");
+        constraints.pathLength = 0;
+        for (const std::byte byte : length)
+            constraints.pathLength = (*constraints.pathLength << 8U) | std::to_integer<std::uint64_t>(byte);
     }
+    fields.expectEnd();
     into.basicConstraints = constraints;
-    return true;
 }
 
-bool readKeyUsage(X509_EXTENSION* extension, CertificateExtensions& into) {
+void readKeyUsage(ByteView value, CertificateExtensions& into) {
     into.keyUsage = 0;
-    const auto decoded = decode<ASN1_BIT_STRING, ASN1_BIT_STRING_free>(extension);
-    if (!decoded) return false;
-    constexpr int kBits = 9;  // digitalSignature (0) to decipherOnly (8)
-    for (int bit = 0; bit < kBits; ++bit) {
-        if (ASN1_BIT_STRING_get_bit(decoded.get(), bit) == 1)
-            *into.keyUsage |= 1U << static_cast<unsigned>(bit);
+    Cursor outer(value);
+    const ByteView bytes = der::bitString(outer.take(der::kBitString).contents);
+    outer.expectEnd();
+    std::uint32_t usage = 0;
+    constexpr std::uint32_t kBits = 9;  // digitalSignature (0) to decipherOnly (8)
+    std::uint32_t bit = 0;
+    for (const std::byte byte : bytes.first(std::min<std::size_t>(bytes.size(), (kBits + 7) / 8))) {
+        for (unsigned mask = 0x80; mask != 0 && bit < kBits; mask >>= 1U, ++bit)
+            if ((std::to_integer<unsigned>(byte) & mask) != 0) usage |= 1U << bit;
     }
-    return true;
+    into.keyUsage = usage;
 }
 
-void freePurposes(EXTENDED_KEY_USAGE* purposes) {
-    sk_ASN1_OBJECT_pop_free(purposes, ASN1_OBJECT_free);
-}
-
-bool readPurposes(X509_EXTENSION* extension, CertificateExtensions& into) {
-    const auto decoded = decode<EXTENDED_KEY_USAGE, freePurposes>(extension);
-    if (!decoded) return false;
-    std::vector<std::string> purposes;
-    for (int i = 0; i < sk_ASN1_OBJECT_num(decoded.get()); ++i) {
-        purposes.push_back(dottedOid(sk_ASN1_OBJECT_value(decoded.get(), i)));
+void readPurposes(ByteView value, CertificateExtensions& into) {
+    into.purposes.emplace();
+    Purposes purposes;
+    for (Cursor list = enterSequence(value); !list.atEnd();) {
+        const std::string oid = list.oid();
+        purposes.serverAuthentication = purposes.serverAuthentication || oid == kServerAuthenticationPurpose;
+        purposes.any = purposes.any || oid == kAnyPurpose;
     }
-    into.purposes = std::move(purposes);
-    return true;
+    into.purposes = purposes;
 }
 
-bool readAlternativeNames(X509_EXTENSION* extension, CertificateExtensions& into) {
-    const auto decoded = decode<GENERAL_NAMES, GENERAL_NAMES_free>(extension);
-    if (!decoded) return false;
+void readAlternativeNames(ByteView value, CertificateExtensions& into) {
     AlternativeNames names;
-    for (int i = 0; i < sk_GENERAL_NAME_num(decoded.get()); ++i) {
-        const GENERAL_NAME* const name = sk_GENERAL_NAME_value(decoded.get(), i);
-        if (name->type == GEN_DNS) {
-            names.dnsNames.push_back(foundation::toString(byteView(name->d.dNSName)));
-        } else if (name->type == GEN_IPADD) {
-            const ByteView address = byteView(name->d.iPAddress);
-            if (address.size() != 4 && address.size() != 16) return false;
-            names.addresses.push_back(foundation::toData(address));
+    for (Cursor list = enterSequence(value); !list.atEnd();) {
+        const GeneralName name = readGeneralName(list.any());
+        if (name.form == GeneralNameForm::dnsName) {
+            names.dnsNames.push_back(foundation::toString(name.contents));
+        } else if (name.form == GeneralNameForm::address) {
+            if (name.contents.size() != 4 && name.contents.size() != 16)
+                throw Malformed("an address is of no known length");
+            names.addresses.push_back(foundation::toData(name.contents));
         }
     }
     into.alternativeNames = std::move(names);
-    return true;
 }
 
-bool readSubjectKeyIdentifier(X509_EXTENSION* extension, CertificateExtensions& into) {
-    const auto decoded = decode<ASN1_OCTET_STRING, ASN1_OCTET_STRING_free>(extension);
-    if (!decoded) return false;
-    into.subjectKeyIdentifier = foundation::toData(byteView(decoded.get()));
-    return true;
+void readConstraints(ByteView value, CertificateExtensions& into) {
+    into.nameConstraints.emplace().hasUnhandledForm = true;
+    into.nameConstraints = readNameConstraints(value);
 }
 
-bool readAuthorityKeyIdentifier(X509_EXTENSION* extension, CertificateExtensions& into) {
-    const auto decoded = decode<AUTHORITY_KEYID, AUTHORITY_KEYID_free>(extension);
-    if (!decoded) return false;
-    if (decoded->keyid != nullptr) into.authorityKeyIdentifier = foundation::toData(byteView(decoded->keyid));
-    return true;
+/// Which policies a certificate was issued under restricts nobody who asks for none (RFC 5280, 4.2.1.4).
+void readCertificatePolicies(ByteView value, CertificateExtensions&) {
+    Cursor list = enterSequence(value);
+    do {  // at least one
+        Cursor policy = list.enter(der::kConstructedSequence);
+        policy.oid();
+        policy.takeIf(der::kConstructedSequence);
+        policy.expectEnd();
+    } while (!list.atEnd());
+}
+
+void readSubjectKeyIdentifier(ByteView value, CertificateExtensions& into) {
+    Cursor outer(value);
+    const ByteView identifier = outer.take(der::kOctetString).contents;
+    outer.expectEnd();
+    into.subjectKeyIdentifier = foundation::toData(identifier);
+}
+
+void readAuthorityKeyIdentifier(ByteView value, CertificateExtensions& into) {
+    Cursor fields = enterSequence(value);
+    const std::optional<Element> identifier = fields.takeIf(der::contextTag(0, false));
+    const std::optional<Element> issuer = fields.takeIf(der::contextTag(1, true));
+    const std::optional<Element> serial = fields.takeIf(der::contextTag(2, false));
+    fields.expectEnd();
+    if (issuer) {
+        for (Cursor names(issuer->contents); !names.atEnd();) readGeneralName(names.any());
+    }
+    if (serial) der::checkInteger(serial->contents);
+    if (identifier) into.authorityKeyIdentifier = foundation::toData(identifier->contents);
 }
 
 struct Reader {
     std::string_view oid;
-    bool (*read)(X509_EXTENSION*, CertificateExtensions&);
+    void (*read)(ByteView value, CertificateExtensions& into);  // throws Malformed
 };
 constexpr std::array kExtensionReaders{
     Reader{kBasicConstraintsOid, readBasicConstraints},
     Reader{kKeyUsageOid, readKeyUsage},
     Reader{kPurposesOid, readPurposes},
     Reader{kAlternativeNamesOid, readAlternativeNames},
+    Reader{kNameConstraintsOid, readConstraints},
+    Reader{kCertificatePoliciesOid, readCertificatePolicies},
     Reader{kSubjectKeyIdentifierOid, readSubjectKeyIdentifier},
     Reader{kAuthorityKeyIdentifierOid, readAuthorityKeyIdentifier},
 };
@@ -134,29 +148,45 @@ const Reader* readerFor(std::string_view oid) {
     return found == kExtensionReaders.end() ? nullptr : found;
 }
 
+bool isReadable(const Reader& reader, ByteView value, CertificateExtensions& into) {
+    try {
+        reader.read(value, into);
+        return true;
+    } catch (const Malformed&) {
+        return false;
+    }
+}
+
 }  // namespace
 
 bool CertificateExtensions::carries(std::string_view oid) const {
     return std::any_of(entries.begin(), entries.end(), [&](const Entry& entry) { return entry.oid == oid; });
 }
 
-bool isUnderstoodExtension(std::string_view oid) {
+bool isUnderstoodExtension(std::string_view oid, bool appliesNameConstraints) {
+    if (oid == kNameConstraintsOid) return appliesNameConstraints;
     return readerFor(oid) != nullptr;
 }
 
-CertificateExtensions readExtensions(const X509* certificate) {
+CertificateExtensions readExtensions(ByteView contents) {
     CertificateExtensions result;
     std::set<std::string, std::less<>> seen;
-    for (int i = 0; i < X509_get_ext_count(certificate); ++i) {
-        X509_EXTENSION* const extension = X509_get_ext(certificate, i);
-        std::string oid = dottedOid(X509_EXTENSION_get_object(extension));
-        if (!seen.insert(oid).second) {
-            result.malformed.push_back(oid);  // RFC 5280, 4.2: not more than once; the first one stays
-        } else if (const Reader* const reader = readerFor(oid); reader != nullptr) {
-            if (!reader->read(extension, result)) result.malformed.push_back(oid);
-        }
-        result.entries.push_back({std::move(oid), X509_EXTENSION_get_critical(extension) == 1});
-    }
+    Cursor list(contents);
+    do {  // at least one
+        if (result.entries.size() == kMaximumExtensions) throw Malformed("there are too many extensions");
+        Cursor extension = list.enter(der::kConstructedSequence);
+        CertificateExtensions::Entry entry{extension.oid(), false};
+        if (const auto next = der::readElement(extension.rest()); next && next->tag == der::kBoolean)
+            entry.critical = extension.boolean();
+        const ByteView value = extension.take(der::kOctetString).contents;
+        extension.expectEnd();
+
+        const Reader* const reader = readerFor(entry.oid);
+        const bool isFirst = seen.insert(entry.oid).second;  // RFC 5280, 4.2: not more than once
+        if (!isFirst || (reader != nullptr && !isReadable(*reader, value, result)))
+            result.malformed.push_back(entry.oid);
+        result.entries.push_back(std::move(entry));
+    } while (!list.atEnd());
     return result;
 }
 

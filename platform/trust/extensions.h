@@ -1,4 +1,18 @@
-// The extensions of a certificate that the checks ask about, read once (RFC 5280, 4.2).
+// The extensions of a certificate that the checks ask about, read once (RFC 5280, 4.2), without a library.
+//
+//   Extensions  SEQUENCE OF SEQUENCE { OBJECT IDENTIFIER, critical BOOLEAN DEFAULT FALSE, value OCTET STRING
+//   }
+//
+//   2.5.29.19  basic constraints     SEQUENCE { CA BOOLEAN DEFAULT FALSE, path length INTEGER OPTIONAL }
+//   2.5.29.15  key usage             BIT STRING, the unused bits zero
+//   2.5.29.37  purposes              SEQUENCE OF OBJECT IDENTIFIER
+//   2.5.29.17  alternative names     SEQUENCE OF GeneralName (general_name.h)
+//   2.5.29.30  name constraints      name_constraints.h
+//   2.5.29.32  certificate policies  SEQUENCE OF SEQUENCE { OBJECT IDENTIFIER, qualifiers SEQUENCE OPTIONAL }
+//   2.5.29.14  key identifier        OCTET STRING
+//   2.5.29.35  the issuer's          SEQUENCE { [0] OCTET STRING OPTIONAL, [1] names, [2] serial number }
+//
+// An extension whose value is not exactly that is malformed, and so is one that occurs twice.
 #pragma once
 
 #include <cstdint>
@@ -8,10 +22,12 @@
 #include <vector>
 
 #include "foundation/bytes.h"
-
-struct x509_st;  // OpenSSL's X509
+#include "trust/name_constraints.h"
 
 namespace pinwell::trust {
+
+/// A certificate of more extensions is refused. Certificates in use have fewer than 20.
+inline constexpr std::size_t kMaximumExtensions = 256;
 
 struct BasicConstraints {
     bool isCertificateAuthority = false;
@@ -19,13 +35,15 @@ struct BasicConstraints {
 };
 
 /// Bits of the key usage extension, as it numbers them.
+inline constexpr std::uint32_t kKeyUsageDigitalSignature = 1U << 0U;
+inline constexpr std::uint32_t kKeyUsageKeyEncipherment = 1U << 2U;
+inline constexpr std::uint32_t kKeyUsageKeyAgreement = 1U << 4U;
 inline constexpr std::uint32_t kKeyUsageCertificateSigning = 1U << 5U;
 
-inline constexpr std::string_view kServerAuthenticationPurpose = "1.3.6.1.5.5.7.3.1";
-
-struct AlternativeNames {
-    std::vector<std::string> dnsNames;
-    std::vector<foundation::Data> addresses;  // 4 or 16 bytes, network order
+/// What the extended key usage names; other purposes are not kept.
+struct Purposes {
+    bool serverAuthentication = false;  // 1.3.6.1.5.5.7.3.1
+    bool any = false;                   // 2.5.29.37.0
 };
 
 /// An extension that is absent, and one that cannot be read, is no value here; the latter is also listed as
@@ -40,8 +58,9 @@ struct CertificateExtensions {
     std::vector<std::string> malformed;  // OIDs of those that cannot be read, or occur more than once
 
     std::optional<BasicConstraints> basicConstraints;
-    std::optional<std::uint32_t> keyUsage;  // a malformed one permits nothing
-    std::optional<std::vector<std::string>> purposes;
+    std::optional<std::uint32_t> keyUsage;           // a malformed one permits nothing
+    std::optional<Purposes> purposes;                // malformed ones name nothing
+    std::optional<NameConstraints> nameConstraints;  // malformed ones permit nothing
     std::optional<AlternativeNames> alternativeNames;
     std::optional<foundation::Data> subjectKeyIdentifier;
     std::optional<foundation::Data> authorityKeyIdentifier;
@@ -49,9 +68,14 @@ struct CertificateExtensions {
     bool carries(std::string_view oid) const;
 };
 
-/// Whether the checks know what an extension of this OID says, so that it may be critical.
-bool isUnderstoodExtension(std::string_view oid);
+inline constexpr std::string_view kNameConstraintsOid = "2.5.29.30";
 
-CertificateExtensions readExtensions(const x509_st* certificate);
+/// Whether the checks know what an extension of this OID says, so that it may be critical. Name constraints
+/// are known where they are applied.
+bool isUnderstoodExtension(std::string_view oid, bool appliesNameConstraints);
+
+/// `contents` are those of the SEQUENCE. Throws der::Malformed if it is none of extensions, holds none, or
+/// too many.
+CertificateExtensions readExtensions(foundation::ByteView contents);
 
 }  // namespace pinwell::trust

@@ -22,6 +22,21 @@ std::optional<Data> parseAddress(int family, std::size_t size, const std::string
     return foundation::toData(foundation::ByteView(address).first(size));
 }
 
+/// Not the C library's, which asks the locale.
+char lowered(char c) {
+    return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
+}
+
+bool coversName(std::string_view presented, std::string_view host) {
+    if (!presented.starts_with("*.")) return isDnsName(presented) && equalNames(presented, host);
+    const std::string_view parent = presented.substr(1);  // with its dot
+    if (!isDnsName(parent.substr(1)) || parent.find('.', 1) == std::string_view::npos) return false;
+    const std::size_t dot = host.find('.');
+    return dot != std::string_view::npos && equalNames(parent, host.substr(dot));
+}
+
+}  // namespace
+
 std::optional<Data> parseAddress(std::string_view host) {
     if (host.find('\0') != std::string_view::npos) return std::nullopt;
     if (host.size() > 2 && host.front() == '[' && host.back() == ']') {
@@ -31,18 +46,11 @@ std::optional<Data> parseAddress(std::string_view host) {
     return address ? address : parseAddress(AF_INET6, 16, std::string(host));
 }
 
-/// Not the C library's, which asks the locale.
-char lowered(char c) {
-    return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
-}
-
 bool equalNames(std::string_view a, std::string_view b) {
     return std::equal(a.begin(), a.end(), b.begin(), b.end(),
                       [](char x, char y) { return lowered(x) == lowered(y); });
 }
 
-/// Letters, digits, hyphens, and the underscore that real hosts have, in labels that are neither empty nor
-/// too long.
 bool isDnsName(std::string_view name) {
     if (name.empty() || name.size() > kMaximumName) return false;
     std::size_t label = 0;
@@ -58,16 +66,6 @@ bool isDnsName(std::string_view name) {
     }
     return label != 0;
 }
-
-bool coversName(std::string_view presented, std::string_view host) {
-    if (!presented.starts_with("*.")) return isDnsName(presented) && equalNames(presented, host);
-    const std::string_view parent = presented.substr(1);  // with its dot
-    if (!isDnsName(parent.substr(1)) || parent.find('.', 1) == std::string_view::npos) return false;
-    const std::size_t dot = host.find('.');
-    return dot != std::string_view::npos && equalNames(parent, host.substr(dot));
-}
-
-}  // namespace
 
 bool coversHost(const AlternativeNames& names, std::string_view host) {
     if (const std::optional<Data> address = parseAddress(host)) {

@@ -2,9 +2,10 @@
 // 5280, 4.2.1.6).
 #pragma once
 
+#include <optional>
 #include <string_view>
 
-#include "trust/extensions.h"
+#include "trust/general_name.h"
 
 namespace pinwell::trust {
 
@@ -13,5 +14,15 @@ namespace pinwell::trust {
 /// without regard to case. A wildcard is the whole leftmost label of a name that has at least two more, and
 /// stands for exactly one label. The subject's common name is never looked at.
 bool coversHost(const AlternativeNames& names, std::string_view host);
+
+/// Letters, digits, hyphens, and the underscore that real hosts have, in labels of 1 to 63 bytes, 253 bytes
+/// in all, without a dot at the end.
+bool isDnsName(std::string_view name);
+
+/// Without regard to the case of ASCII letters.
+bool equalNames(std::string_view a, std::string_view b);
+
+/// 4 or 16 bytes in network order; an IPv6 address may be in brackets. `nullopt` if it is no address.
+std::optional<foundation::Data> parseAddress(std::string_view host);
 
 }  // namespace pinwell::trust

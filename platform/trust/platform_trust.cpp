@@ -7,35 +7,52 @@
 namespace pinwell::trust {
 namespace {
 
-CertificateList loadFiles(const std::vector<std::string>& paths,
-                          const std::function<void(std::string_view)>& logError) {
-    CertificateList certificates;
+using LogError = std::function<void(std::string_view)>;
+
+/// Hands over the contents of each file that can be read.
+void readFiles(const std::vector<std::string>& paths, const LogError& logError,
+               const std::function<void(const std::string& path, ByteView text)>& use) {
     for (const std::string& path : paths) {
         const foundation::Result<Data> text = foundation::readSmallFile(path, kMaximumPemFileSize);
-        if (!text) {
+        if (text) {
+            use(path, *text);
+        } else {
             logError(
                 foundation::format("Could not read certificates. %@", text.error().localizedDescription()));
-            continue;
         }
-        const std::optional<CertificateList> read = readPem(*text);
-        if (!read) {
+    }
+}
+
+CertificateList loadFiles(const std::vector<std::string>& paths, const LogError& logError) {
+    CertificateList certificates;
+    readFiles(paths, logError, [&](const std::string& path, ByteView text) {
+        if (const std::optional<CertificateList> read = readPem(text)) {
+            certificates.insert(certificates.end(), read->begin(), read->end());
+        } else {
             logError(
                 foundation::format("Could not read certificates. %@: not a PEM file of certificates.", path));
-            continue;
         }
-        certificates.insert(certificates.end(), read->begin(), read->end());
-    }
+    });
     return certificates;
+}
+
+DenyList loadDenied(const std::vector<std::string>& paths, const LogError& logError) {
+    DenyList denied;
+    readFiles(paths, logError, [&](const std::string& path, ByteView text) {
+        readDeniedPem(text, denied, [&](const std::string& reason) {
+            logError(foundation::format("Could not read certificates. %@: %@.", path, reason));
+        });
+    });
+    return denied;
 }
 
 }  // namespace
 
-Anchors loadAnchors(const foundation::PlatformDirectory& directory,
-                    const std::function<void(std::string_view)>& logError) {
+Anchors loadAnchors(const foundation::PlatformDirectory& directory, const LogError& logError) {
     return {loadFiles(directory.rootCertificateFiles(), logError),
             loadFiles(directory.compatibilityRootCertificateFiles(), logError),
             loadFiles(directory.userAllowedCertificateFiles(), logError),
-            loadFiles(directory.userDeniedCertificateFiles(), logError)};
+            loadDenied(directory.userDeniedCertificateFiles(), logError)};
 }
 
 std::unique_ptr<TrustService> makeTrustService(foundation::PlatformDirectory directory,

@@ -13,8 +13,13 @@ using foundation::format;
 /// Collects what is wrong with one chain.
 class Examination {
   public:
-    Examination(const CandidateChain& chain, const Requirements& requirements, Date now)
-        : chain_(chain), certificates_(chain.certificates), requirements_(requirements), now_(now) {}
+    Examination(const CandidateChain& chain, const Requirements& requirements, Date now,
+                NameConstraintCheck& names)
+        : chain_(chain),
+          certificates_(chain.certificates),
+          requirements_(requirements),
+          now_(now),
+          names_(names) {}
 
     std::vector<Failure> run() && {
         checkTrustAndSignatures();
@@ -49,8 +54,7 @@ class Examination {
 
     void checkTrustAndSignatures() {
         const std::size_t last = certificates_.size() - 1;
-        if (chain_.denied)
-            fail(Verdict::deny, *chain_.denied, "the user has chosen not to trust the certificate");
+        if (chain_.denied) fail(Verdict::deny, *chain_.denied, std::string(kDistrusted));
         if (chain_.badSignature) {
             fail(Verdict::fatalFailure, *chain_.badSignature,
                  "its issuer's key does not verify the signature");
@@ -84,7 +88,9 @@ class Examination {
                  format("the extension %@ is malformed", extensions.malformed.front()));
         }
         for (const auto& entry : extensions.entries) {
-            if (!entry.critical || isUnderstoodExtension(entry.oid) || isMarkerOfPolicy(entry.oid)) continue;
+            if (!entry.critical || isUnderstoodExtension(entry.oid, requirements_.nameConstraints) ||
+                isMarkerOfPolicy(entry.oid))
+                continue;
             fail(Verdict::fatalFailure, i, format("the critical extension %@ is not known", entry.oid));
             return;
         }
@@ -103,8 +109,8 @@ class Examination {
         if (!key) return fail(i, "the public key cannot be used");
         const auto minimum = requirements_.keySizes->find(key->type());
         if (minimum == requirements_.keySizes->end()) return fail(i, "the policy admits no key of this kind");
-        if (static_cast<std::uint64_t>(key->bits()) < minimum->second) {
-            fail(i, format("the key has %d bits; at least %lu are needed", key->bits(), minimum->second));
+        if (key->bits() < minimum->second) {
+            fail(i, format("the key has %zu bits; at least %lu are needed", key->bits(), minimum->second));
         }
     }
 
@@ -117,6 +123,41 @@ class Examination {
             fail(i, "the authority key identifier is not the issuer's");
         }
         if (requirements_.basicConstraints) checkAuthority(i + 1);
+        if (requirements_.nameConstraints && issuer.nameConstraints) checkNames(i + 1);
+        if (requirements_.serverAuthentication && issuer.purposes && !issuer.purposes->any &&
+            !issuer.purposes->serverAuthentication) {
+            fail(i + 1, "the issuer's purposes do not include server authentication");
+        }
+    }
+
+    /// The constraints of certificate i hold for the host and for every certificate below. One in between
+    /// that has issued itself is exempt (RFC 5280, 6.1.3 (b)).
+    void checkNames(std::size_t i) {
+        const NameConstraints& constraints = *certificates_[i]->extensions().nameConstraints;
+        if (requirements_.hostName && !isPermitted(i, names_.judgeHost(constraints, *requirements_.hostName)))
+            return;
+        for (std::size_t below = 0; below < i; ++below) {
+            const auto& names = certificates_[below]->extensions().alternativeNames;
+            if (!names || (below != 0 && certificates_[below]->isSelfIssued())) continue;
+            if (!isPermitted(i, names_.judge(constraints, *names))) return;
+        }
+    }
+
+    bool isPermitted(std::size_t i, NameJudgement judgement) {
+        switch (judgement) {
+            case NameJudgement::permitted:
+                return true;
+            case NameJudgement::excluded:
+                fail(i, "the name constraints exclude the host or a name of a certificate below");
+                break;
+            case NameJudgement::unhandled:
+                fail(i, "the name constraints have a form that is not handled");
+                break;
+            case NameJudgement::tooMany:
+                fail(i, "there are too many names and name constraints to compare");
+                break;
+        }
+        return false;
     }
 
     /// A CA is one whose basic constraints say so and whose key usage, where stated, permits it (RFC
@@ -147,12 +188,18 @@ class Examination {
             (!leaf.alternativeNames || !coversHost(*leaf.alternativeNames, *requirements_.hostName))) {
             fail(0, format("the certificate is not for the host %@", *requirements_.hostName));
         }
-        // It must be named: a policy may require that (RFC 5280, 4.2.1.12), and "any purpose" names none.
-        if (requirements_.serverAuthentication &&
-            (!leaf.purposes || std::find(leaf.purposes->begin(), leaf.purposes->end(),
-                                         kServerAuthenticationPurpose) == leaf.purposes->end())) {
+        if (requirements_.serverAuthentication) checkLeafPurpose(leaf);
+    }
+
+    /// The purpose must be named: a policy may require that (RFC 5280, 4.2.1.12), and "any purpose" names
+    /// none.
+    void checkLeafPurpose(const CertificateExtensions& leaf) {
+        if (!leaf.purposes || !leaf.purposes->serverAuthentication)
             fail(0, "the certificate is not for server authentication");
-        }
+        // The uses that are consistent with the purpose, by the same section.
+        constexpr std::uint32_t kTls =
+            kKeyUsageDigitalSignature | kKeyUsageKeyEncipherment | kKeyUsageKeyAgreement;
+        if (leaf.keyUsage && (*leaf.keyUsage & kTls) == 0) fail(0, "the key usage does not permit TLS");
     }
 
     void checkChainAsAWhole() {
@@ -175,13 +222,15 @@ class Examination {
     const CertificateList& certificates_;
     const Requirements& requirements_;
     Date now_;
+    NameConstraintCheck& names_;
     std::vector<Failure> failures_;
 };
 
 }  // namespace
 
-std::vector<Failure> checkChain(const CandidateChain& chain, const Requirements& requirements, Date now) {
-    return Examination(chain, requirements, now).run();
+std::vector<Failure> checkChain(const CandidateChain& chain, const Requirements& requirements, Date now,
+                                NameConstraintCheck& names) {
+    return Examination(chain, requirements, now, names).run();
 }
 
 }  // namespace pinwell::trust

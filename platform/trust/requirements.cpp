@@ -70,6 +70,8 @@ constexpr std::array kRequirementReaders{
                  [](const Value& v, Requirements& r) { return readSwitch(v, r.validityDates); }},
     OptionReader{option::kServerAuthentication,
                  [](const Value& v, Requirements& r) { return readSwitch(v, r.serverAuthentication); }},
+    OptionReader{option::kNameConstraints,
+                 [](const Value& v, Requirements& r) { return readSwitch(v, r.nameConstraints); }},
     OptionReader{option::kPlatformAnchor,
                  [](const Value& v, Requirements& r) { return readAnchorSet(v, AnchorSet::platform, r); }},
     OptionReader{option::kCompatibilityAnchor,

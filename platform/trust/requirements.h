@@ -21,6 +21,7 @@ struct Requirements {
     bool nonEmptySubject = false;
     bool validityDates = false;
     bool serverAuthentication = false;
+    bool nameConstraints = false;
     AnchorSet anchors = AnchorSet::platform;  // a chain must be anchored somewhere, whatever the list says
     std::optional<std::uint64_t> chainLength;
     std::vector<std::string> intermediateMarkers;

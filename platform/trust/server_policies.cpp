@@ -20,6 +20,7 @@ Dictionary serverOptions(std::string_view host) {
     options.emplace(option::kValidityDates, true);
     options.emplace(option::kHostName, host);
     options.emplace(option::kServerAuthentication, true);
+    options.emplace(option::kNameConstraints, true);
     options.emplace(option::kBasicConstraints, true);
     options.emplace(option::kCriticalExtensions, true);
     options.emplace(option::kKeySize, std::move(keySizes));

@@ -64,10 +64,15 @@ class PublicKey {
 };
 using PublicKeyRef = std::shared_ptr<const PublicKey>;
 
-/// Option keys. The value's type stands behind each; `true` switches a check on. An option that is not among
+/// Option keys. The value's type is behind each; `true` switches a check on. An option that is not among
 /// these, or whose value is of another type, makes the verdict otherError. Without an anchor option the
 /// anchors are those of kPlatformAnchor. Certificates are checked root included; of a list of marker OIDs all
 /// must be there.
+///
+/// kServerAuthentication: the leaf's purposes name it; an issuer that has purposes has it or "any" among
+/// them, the anchor included; and the leaf's key usage, where it is stated, allows TLS. kNameConstraints:
+/// those of every issuer, the anchor included, critical or not, hold for the host and for all names of the
+/// certificates below; without the option, critical name constraints are not known.
 namespace option {
 inline constexpr std::string_view kCriticalExtensions = "CriticalExtensions";  // true
 inline constexpr std::string_view kIdLinkage = "IdLinkage";                    // true
@@ -85,6 +90,7 @@ inline constexpr std::string_view kKeySize = "KeySize";              // key type
 inline constexpr std::string_view kValidityDates = "ValidityDates";  // true
 inline constexpr std::string_view kHostName = "HostName";            // DNS name or IP address
 inline constexpr std::string_view kServerAuthentication = "ServerAuthentication";  // true
+inline constexpr std::string_view kNameConstraints = "NameConstraints";            // true
 }  // namespace option
 
 /// Key types, the keys of the kKeySize dictionary.
@@ -142,7 +148,7 @@ class TrustService {
   public:
     virtual ~TrustService() = default;
 
-    /// Null when `der` is not exactly one well-formed certificate.
+    /// Null if `der` is not exactly one well-formed certificate.
     virtual CertificateRef createCertificate(ByteView der) = 0;
 
     /// A policy from the platform security library's argument-less constructor of that name.

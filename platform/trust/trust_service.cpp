@@ -55,6 +55,8 @@ struct Judgement {
         return chain.anchoring == Anchoring::platform ? Verdict::unspecified : Verdict::proceed;
     }
 
+    bool isTrusted() const { return failures.empty(); }
+
     /// Which of two chains for the same leaf to go by. Of the bad ones, one that the user distrusts says most
     /// about why the leaf is refused, then one that ends where it should.
     int rank() const {
@@ -71,15 +73,32 @@ struct Judgement {
     }
 };
 
-Judgement judge(const CertificateList& given, const Requirements& requirements, Environment& environment) {
+/// What a search that ended at a bound has shown: nothing but that, unless the leaf itself is distrusted.
+Judgement exhausted(const CertificateList& given, const Anchors& anchors) {
+    Judgement judgement{{{given.front()}, std::nullopt, std::nullopt, Anchoring::none}, {}};
+    if (anchors.denied.reaches(*given.front())) {
+        judgement.failures.push_back({Verdict::deny, 0, std::string(kDistrusted)});
+    } else {
+        judgement.failures.push_back({Verdict::recoverableFailure, 0,
+                                      "the search for a chain was given up, since the certificates allow too "
+                                      "many or too long chains"});
+    }
+    return judgement;
+}
+
+Judgement judge(const CertificateList& given, const Requirements& requirements, Environment& environment,
+                SignatureChecks& checks) {
     Judgement best;
     const Date now = environment.now();
-    ChainBuilder builder(given, environment.platformAnchors(requirements.anchors), environment.anchors());
+    NameConstraintCheck names;
+    ChainBuilder builder(given, environment.platformAnchors(requirements.anchors), environment.anchors(),
+                         checks);
     builder.build([&](const CandidateChain& chain) {
-        Judgement judgement{chain, checkChain(chain, requirements, now)};
+        Judgement judgement{chain, checkChain(chain, requirements, now, names)};
         if (best.chain.certificates.empty() || judgement.rank() > best.rank()) best = std::move(judgement);
         return best.verdict() == Verdict::unspecified;
     });
+    if (builder.isExhausted() && !best.isTrusted()) return exhausted(given, environment.anchors());
     return best;
 }
 
@@ -107,7 +126,7 @@ class ChainTrust final : public Trust {
             verdict = Verdict::otherError;
             return kSuccess;
         }
-        judgement_ = judge(certificates_, *requirements, *environment_);
+        judgement_ = judge(certificates_, *requirements, *environment_, checks_);
         verdict = judgement_->verdict();
         return kSuccess;
     }
@@ -144,6 +163,7 @@ class ChainTrust final : public Trust {
     std::shared_ptr<Environment> environment_;
     CertificateList certificates_;
     PolicyRef policy_;
+    SignatureChecks checks_;  // of all policies together
     std::optional<Judgement> judgement_;
     std::optional<std::string> policyError_;
 };

@@ -3,15 +3,16 @@
 #include <algorithm>
 #include <array>
 #include <optional>
-#include <stdexcept>
 #include <string_view>
 
+#include "chain_vocabulary.h"
+#include "support/key_forms.h"
 #include "support/ticket_builder.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::Data;
+using namespace faults;
 using trust::kDay;
 using trust::kHost;
 using trust::kNow;
@@ -21,22 +22,6 @@ enum Position : std::size_t { kLeaf, kIntermediate, kRoot };
 constexpr std::array kPositions{"leaf", "intermediate", "root"};
 constexpr std::array kPolicies{"ticket", "pinned", "compatibility"};
 
-constexpr const char* kBasicConstraints = "2.5.29.19";
-constexpr const char* kKeyUsage = "2.5.29.15";
-constexpr const char* kAlternativeNames = "2.5.29.17";
-constexpr const char* kPurposes = "2.5.29.37";
-constexpr const char* kSubjectKeyIdentifier = "2.5.29.14";
-constexpr const char* kAuthorityKeyIdentifier = "2.5.29.35";
-constexpr const char* kUnknown = "1.2.3.4.5";
-
-struct CertificateFault {
-    const char* name;
-    const char* wrong;
-    const char* verdicts;
-    std::function<void(CertificateFields&, ChainFields&)> fields;
-    std::function<void(Data&)> der = nullptr;  // what becomes of the certificate in the list
-};
-
 struct ChainFault {
     const char* name;
     const char* wrong;
@@ -45,69 +30,12 @@ struct ChainFault {
     std::function<void(Scene&, const ChainFields&)> arrangement = nullptr;
     std::string host = kHost;
 };
-
-using C = CertificateFields;
-using Chain = ChainFields;
-
-Data bytes(std::initializer_list<int> values) {
-    Data data;
-    for (const int value : values) data.push_back(static_cast<std::byte>(value));
-    return data;
-}
-
-void replace(CertificateFields& c, const char* oid, bool critical, Data value = bytes({5, 0})) {
-    c.extensions.push_back({oid, critical, std::move(value)});
-}
-
-void withoutExtensions(CertificateFields& c) {
-    c.basicConstraints.reset();
-    c.keyUsage.clear();
-    c.extendedKeyUsage.clear();
-    c.subjectAlternativeNames.clear();
-    c.subjectKeyIdentifier = c.authorityKeyIdentifier = KeyIdentifier::omitted();
-    c.markers.clear();
-}
-
-void useKey(CertificateFields& c, KeyKind kind) {
-    c.key = SigningKey::cached(kind, "faulty");
-}
-
-void everyKeyRsa(ChainFields& chain) {
-    chain.root.key = SigningKey::cached(KeyKind::rsa2048, "faulty root");
-    chain.intermediate.key = SigningKey::cached(KeyKind::rsa2048, "faulty intermediate");
-}
-
 /// The same chain in every word, of other keys.
 IssuedChain impostorOf(ChainFields fields) {
     fields.root.key = SigningKey::cached(KeyKind::p256, "impostor root");
     fields.intermediate.key = SigningKey::cached(KeyKind::p256, "impostor intermediate");
     fields.leaf.key = SigningKey::cached(KeyKind::p256, "impostor leaf");
     return fields.issue();
-}
-
-/// Changes the byte behind the n-th place at which `pattern` stands; an error when there is none.
-void flipBehind(Data& der, const Data& pattern, std::size_t offset, bool last, std::byte mask) {
-    const auto found = last ? std::find_end(der.begin(), der.end(), pattern.begin(), pattern.end())
-                            : std::search(der.begin(), der.end(), pattern.begin(), pattern.end());
-    if (found == der.end()) throw std::runtime_error("the certificate does not hold what shall be changed");
-    der.at(static_cast<std::size_t>(found - der.begin()) + pattern.size() + offset) ^= mask;
-}
-
-const Data kEcdsaWithSha2 = bytes({0x06, 0x08, 0x2A, 0x86, 0x48, 0xCE, 0x3D, 0x04, 0x03});
-const Data kPointBits = bytes({0x03, 0x42, 0x00, 0x04});
-
-/// Its length in the form of one byte more than needed.
-void lengthenLength(Data& der) {
-    if (der.at(1) != std::byte{0x82})
-        throw std::runtime_error("a certificate of 256 to 65535 bytes expected");
-    der[1] = std::byte{0x83};
-    der.insert(der.begin() + 2, std::byte{0});
-}
-
-void makeIndefinite(Data& der) {
-    der.erase(der.begin() + 2, der.begin() + 4);
-    der[1] = std::byte{0x80};
-    der.resize(der.size() + 2);
 }
 
 void makeLonger(ChainFields& chain, std::optional<int> pathLength) {
@@ -173,6 +101,66 @@ Data renewed(const Scene& scene, const ChainFields& fields, Position position) {
     return issueCertificate(later, &at(scene.chain, position == kLeaf ? kIntermediate : kRoot)).der;
 }
 
+/// The leaf issued again with its key in another form.
+Data leafWithKey(const Scene& scene, const ChainFields& fields, Data (*form)(foundation::ByteView)) {
+    CertificateFields leaf = fields.leaf;
+    leaf.serial += 100;
+    leaf.edit = [form](CertificateElements& all) { all.key = form(all.key); };
+    return issueCertificate(leaf, &scene.chain.intermediate).der;
+}
+
+/// Levels of certificates between leaf and intermediate, each of which could have issued each of the level
+/// below.
+void branchOut(Scene& scene, const ChainFields& fields, int levels, int width) {
+    std::vector<Data> list;
+    IssuedCertificate above = scene.chain.intermediate;
+    for (int level = 0; level < levels; ++level) {
+        CertificateFields next = fields.intermediate;
+        next.subject = commonName("Level " + std::to_string(level));
+        IssuedCertificate issued = above;
+        for (int i = 0; i < width; ++i) {
+            ++next.serial;
+            issued = issueCertificate(next, &above);
+            list.push_back(issued.der);
+        }
+        above = issued;
+    }
+    list.insert(list.begin(), issueCertificate(fields.leaf, &above).der);
+    list.push_back(scene.chain.intermediate.der);
+    scene.list = std::move(list);
+}
+
+/// Certificates of one name and without key identifiers, each of which has issued the one before: every pair
+/// has to be checked.
+void namesakes(Scene& scene, const ChainFields& fields) {
+    const auto key = [](std::size_t i) {
+        return SigningKey::cached(KeyKind::p256, "namesake " + std::to_string(i));
+    };
+    constexpr std::size_t kCount = 40;
+    scene.list.clear();
+    for (std::size_t i = 0; i < kCount; ++i) {
+        CertificateFields one = i == 0 ? fields.leaf : fields.intermediate;
+        one.subject = commonName("Same");
+        one.issuer = one.subject;
+        one.key = key(i);
+        one.signer = key((i + 1) % kCount);
+        one.subjectKeyIdentifier = one.authorityKeyIdentifier = KeyIdentifier::omitted();
+        scene.list.push_back(issueCertificate(one, nullptr).der);
+    }
+}
+
+/// So many names of the leaf below so many constraints of the root, all of which permit the host.
+void crossNames(ChainFields& chain, int nameCount, int constraintCount) {
+    const Data host = derElement(0x82, foundation::asBytes(kHost));
+    Data all;
+    for (int i = 0; i < nameCount; ++i) foundation::append(all, host);
+    chain.leaf.subjectAlternativeNames.clear();
+    replace(chain.leaf, kAlternativeNames, false, derElement(0x30, all));
+    Data subtrees;
+    for (int i = 0; i < constraintCount; ++i) foundation::append(subtrees, derElement(0x30, host));
+    replace(chain.root, kNameConstraints, false, derElement(0x30, derElement(0xA0, subtrees)));
+}
+
 void names(ChainFields& chain, const char* words) {
     chain.leaf.subjectAlternativeNames = words;
 }
@@ -185,103 +173,7 @@ void rawName(ChainFields& chain, std::uint8_t tag, std::string_view text) {
 }
 constexpr std::uint8_t kDnsName = 0x82;
 constexpr std::uint8_t kAddress = 0x87;
-
 // clang-format off
-const std::vector<CertificateFault>& certificateFaults() {
-    static const std::vector<CertificateFault> faults{
-        // Validity.
-        {"Expired", "expired a second ago; the ticket policy has no option on dates", "444 555 555", [](C& c, Chain&) { c.notAfter = {kNow.seconds - 1}; }},
-        {"ExpiredLongAgo", "expired in 1999; the ticket policy has no option on dates", "444 555 555", [](C& c, Chain&) { c.notBefore = {800000000}; c.notAfter = {946684799}; }},
-        {"NotValidYet", "valid from the next second; the ticket policy has no option on dates", "444 555 555", [](C& c, Chain&) { c.notBefore = {kNow.seconds + 1}; }},
-        {"ValidityInverted", "ends before it begins; the ticket policy has no option on dates", "444 555 555", [](C& c, Chain&) { c.notBefore = {kNow.seconds + kDay}; c.notAfter = {kNow.seconds - kDay}; }},
-        // Signatures. A root is an anchor byte for byte: nothing is asked of its own signature.
-        {"SignatureCorrupt", "the last bit of the signature is flipped; a root's own is not looked at", "664 664 664", [](C& c, Chain&) { c.corruptSignature = true; }},
-        {"SignedByAnotherKey", "signed by a key that is not the issuer's; a root's own signature is not looked at", "664 664 664", [](C& c, Chain&) { c.signer = SigningKey::cached(KeyKind::p256, "another"); }},
-        {"SignedByItself", "signed by its own key, under its issuer's name; a root is", "664 664 664", [](C& c, Chain&) { c.signer = c.key; }},
-        {"SignedByTheLeaf", "signed by the leaf's key; a root's own signature is not looked at", "664 664 664", [](C& c, Chain& chain) { c.signer = chain.leaf.key; }},
-        {"SignedOverSha1", "the signature rests on SHA-1; the root's own is aside", "554 554 554", [](C& c, Chain&) { c.digest = SignatureDigest::sha1; }},
-        {"SignedOverMd5", "the signature rests on MD5; the root's own is aside", "554 554 554", [](C& c, Chain& chain) { everyKeyRsa(chain); c.digest = SignatureDigest::md5; }},
-        {"SignedWithRsaOverSha1", "an RSA signature rests on SHA-1; the root's own is aside", "554 554 554", [](C& c, Chain& chain) { everyKeyRsa(chain); c.digest = SignatureDigest::sha1; }},
-        {"OuterAlgorithmDiffers", "the algorithm outside is not the signed one; the anchor stands in for such a root", "664 664 664", nullptr, [](Data& der) { flipBehind(der, kEcdsaWithSha2, 0, true, std::byte{1}); }},
-        {"InnerAlgorithmDiffers", "the signed algorithm is not the one outside; the anchor stands in for such a root", "664 664 664", nullptr, [](Data& der) { flipBehind(der, kEcdsaWithSha2, 0, false, std::byte{1}); }},
-        {"PublicKeyChanged", "a bit of the public key is flipped; the anchor stands in for such a root", "664 664 664", nullptr, [](Data& der) { flipBehind(der, kPointBits, 9, false, std::byte{1}); }},
-        // Names.
-        {"IssuerNameDiffers", "names an issuer that is not there; a root that is an anchor needs none", "554 554 554", [](C& c, Chain&) { c.issuer = commonName("Somebody Else"); }},
-        {"IssuerNameInAnotherOrder", "the issuer's name parts are in another order; a root that is an anchor needs none", "554 554 554", [](C& c, Chain& chain) { c.issuer = &c == &chain.leaf ? chain.intermediate.subject : chain.root.subject; std::reverse(c.issuer->begin(), c.issuer->end()); }},
-        {"IssuerNameEmpty", "the issuer's name is empty; a root that is an anchor needs none", "554 554 554", [](C& c, Chain&) { c.issuer.emplace(); }},
-        {"SubjectEmpty", "the subject is empty; server policies have no option on it", "555 444 444", [](C& c, Chain&) { c.subject.clear(); }},
-        {"AuthorityKeyIdentifierDiffers", "names another key of its issuer; server policies have no option on linkage, a root has no issuer", "554 444 444", [](C& c, Chain&) { c.authorityKeyIdentifier = KeyIdentifier::given("another"); }},
-        {"AuthorityKeyIdentifierEmpty", "names an empty key identifier; server policies have no option on linkage, a root has no issuer", "554 444 444", [](C& c, Chain&) { c.authorityKeyIdentifier = KeyIdentifier::given(""); }},
-        // Keys.
-        {"KeyP224", "a curve of 224 bits", "555 555 555", [](C& c, Chain&) { useKey(c, KeyKind::p224); }},
-        {"KeyRsa1024", "an RSA key of 1024 bits", "555 555 555", [](C& c, Chain&) { useKey(c, KeyKind::rsa1024); }},
-        {"KeyEd25519", "a kind of key that the policy does not admit", "555 555 555", [](C& c, Chain&) { useKey(c, KeyKind::ed25519); }},
-        {"KeyWithACurveOfItsOwn", "the key describes its curve and names none, so it cannot be read", "566 566 566", [](C& c, Chain&) { useKey(c, KeyKind::p256Described); }},
-        // Basic constraints and key usage: a matter of the issuers.
-        {"NoBasicConstraints", "has no basic constraints; a leaf needs none", "455 455 455", [](C& c, Chain&) { c.basicConstraints.reset(); }},
-        {"NotAnAuthority", "its basic constraints say CA:FALSE", "-55 -55 -55", [](C& c, Chain&) { c.basicConstraints = BasicConstraints{false}; }},
-        {"ALeafThatIsAnAuthority", "a leaf that says CA:TRUE; basic constraints are a matter of the issuers", "4-- 4-- 4--", [](C& c, Chain&) { c.basicConstraints = BasicConstraints{true}; }},
-        {"PathLengthZero", "the path length of 0 leaves no room for the intermediate below", "--5 --5 --5", [](C& c, Chain&) { c.basicConstraints = BasicConstraints{true, 0}; }},
-        {"PathLengthZeroNotCritical", "a path length of 0 counts in an extension that is not critical", "--5 --5 --5", [](C& c, Chain&) { c.basicConstraints = BasicConstraints{true, 0, false}; }},
-        {"PathLengthNegative", "a path length of -1", "666 666 666", [](C& c, Chain&) { c.basicConstraints.reset(); replace(c, kBasicConstraints, true, bytes({0x30, 6, 1, 1, 0xFF, 2, 1, 0xFF})); }},
-        {"PathLengthOf9Bytes", "a path length of 2^64", "666 666 666", [](C& c, Chain&) { c.basicConstraints.reset(); replace(c, kBasicConstraints, true, bytes({0x30, 14, 1, 1, 0xFF, 2, 9, 1, 0, 0, 0, 0, 0, 0, 0, 0})); }},
-        {"NoKeyCertSign", "the key usage lacks keyCertSign; a leaf signs no certificates", "455 455 455", [](C& c, Chain&) { c.keyUsage = "critical,digitalSignature,cRLSign"; }},
-        {"NoKeyCertSignNotCritical", "the key usage counts in an extension that is not critical; a leaf signs no certificates", "455 455 455", [](C& c, Chain&) { c.keyUsage = "digitalSignature"; }},
-        {"KeyUsageEmpty", "a key usage of no bit at all; a leaf signs no certificates", "455 455 455", [](C& c, Chain&) { c.keyUsage.clear(); replace(c, kKeyUsage, true, bytes({3, 1, 0})); }},
-        // Extensions.
-        {"UnknownCritical", "a critical extension that nobody knows", "666 666 666", [](C& c, Chain&) { replace(c, kUnknown, true); }},
-        {"NameConstraintsCritical", "critical name constraints, which are not understood here", "666 666 666", [](C& c, Chain&) { replace(c, "2.5.29.30", true); }},
-        {"PolicyConstraintsCritical", "critical policy constraints, which are not understood here", "666 666 666", [](C& c, Chain&) { replace(c, "2.5.29.36", true); }},
-        {"PoliciesCritical", "critical certificate policies, which are not understood here", "666 666 666", [](C& c, Chain&) { replace(c, "2.5.29.32", true); }},
-        {"UnknownTwice", "one extension twice", "666 666 666", [](C& c, Chain&) { replace(c, kUnknown, false); replace(c, kUnknown, false); }},
-        {"BasicConstraintsTwice", "two basic constraints, the second says CA:FALSE", "666 666 666", [](C& c, Chain&) { replace(c, kBasicConstraints, true, bytes({0x30, 0})); }},
-        {"BasicConstraintsMalformed", "a NULL in the place of basic constraints", "666 666 666", [](C& c, Chain&) { c.basicConstraints.reset(); replace(c, kBasicConstraints, true); }},
-        {"BasicConstraintsMalformedNotCritical", "a NULL in the place of basic constraints that are not critical", "666 666 666", [](C& c, Chain&) { c.basicConstraints.reset(); replace(c, kBasicConstraints, false); }},
-        {"KeyUsageMalformed", "a NULL in the place of the key usage", "666 666 666", [](C& c, Chain&) { c.keyUsage.clear(); replace(c, kKeyUsage, true); }},
-        {"PurposesMalformed", "a NULL in the place of the purposes", "666 666 666", [](C& c, Chain&) { c.extendedKeyUsage.clear(); replace(c, kPurposes, false); }},
-        {"AlternativeNamesMalformed", "a NULL in the place of the names", "666 666 666", [](C& c, Chain&) { c.subjectAlternativeNames.clear(); replace(c, kAlternativeNames, false); }},
-        {"SubjectKeyIdentifierMalformed", "a NULL in the place of the key identifier", "666 666 666", [](C& c, Chain&) { c.subjectKeyIdentifier = KeyIdentifier::omitted(); replace(c, kSubjectKeyIdentifier, false); }},
-        {"AuthorityKeyIdentifierMalformed", "a NULL in the place of the issuer's key identifier", "666 666 666", [](C& c, Chain&) { c.authorityKeyIdentifier = KeyIdentifier::omitted(); replace(c, kAuthorityKeyIdentifier, false); }},
-        {"BytesBehindAnExtensionsValue", "a byte behind the value inside an extension", "666 666 666", [](C& c, Chain&) { c.keyUsage.clear(); replace(c, kKeyUsage, true, bytes({3, 2, 2, 4, 0})); }},
-        // Markers.
-        {"MarkersMissing", "carries no marker; only the ticket's leaf and intermediate and the pinned leaf need one", "554 544 444", [](C& c, Chain&) { c.markers.clear(); }},
-        {"MarkerOneDigitOff", "the last number of the marker is one more; the compatibility policy asks for none", "55- 5-- 4--", [](C& c, Chain&) { c.markers.at(0).back() = static_cast<char>(c.markers.at(0).back() + 1); }},
-        {"MarkerOfTheOtherKind", "carries the marker of the other sort of leaf; the compatibility policy asks for none", "5-- 5-- 4--", [](C& c, Chain&) { c.markers = {c.markers.at(0) == kTicketLeafMarker ? kPinnedServerMarker : kTicketLeafMarker}; }},
-        {"LeafMarkerHereInstead", "the leaf's marker stands here instead of in the leaf; the compatibility policy asks for none", "-55 -55 -44", [](C& c, Chain& chain) { const auto moved = chain.leaf.markers; chain.leaf.markers.clear(); c.markers.push_back(moved.at(0)); }},
-        {"IntermediateMarkerHereInstead", "the intermediate's marker stands here instead of in the intermediate", "5-5 --- ---", [](C& c, Chain& chain) { const auto moved = chain.intermediate.markers; chain.intermediate.markers.clear(); c.markers.push_back(moved.at(0)); }},
-        {"MarkerAsPurpose", "the marker is listed among the purposes and is no extension; the compatibility policy asks for none", "55- 5-- 4--", [](C& c, Chain&) { c.extendedKeyUsage += (c.extendedKeyUsage.empty() ? "" : ",") + c.markers.at(0); c.markers.clear(); }},
-        {"ForeignMarkerCritical", "the pinned marker is critical; only the pinned policy knows it", "6-- 4-- 6--", [](C& c, Chain&) { c.markers.erase(std::remove(c.markers.begin(), c.markers.end(), kPinnedServerMarker), c.markers.end()); replace(c, kPinnedServerMarker, true); }},
-        // Purposes: of the leaf, and no option of the ticket policy.
-        {"PurposeOfAClient", "for clients alone; purposes are the leaf's, and no option of the ticket policy", "444 544 544", [](C& c, Chain&) { c.extendedKeyUsage = "critical,clientAuth"; }},
-        {"PurposeOfMail", "for mail alone; purposes are the leaf's, and no option of the ticket policy", "444 544 544", [](C& c, Chain&) { c.extendedKeyUsage = "emailProtection"; }},
-        {"AnyPurpose", "for any purpose, which names none; purposes are the leaf's, and no option of the ticket policy", "444 544 544", [](C& c, Chain&) { c.extendedKeyUsage = "anyExtendedKeyUsage"; }},
-        {"NoPurpose", "names no purpose; purposes are the leaf's, and no option of the ticket policy", "444 544 544", [](C& c, Chain&) { c.extendedKeyUsage.clear(); }},
-        {"PurposesEmpty", "an empty list of purposes; purposes are the leaf's, and no option of the ticket policy", "444 544 544", [](C& c, Chain&) { c.extendedKeyUsage.clear(); replace(c, kPurposes, false, bytes({0x30, 0})); }},
-        // Versions and serial numbers.
-        {"Version1", "of version 1, so without extensions", "555 555 555", [](C& c, Chain&) { c.version = 1; withoutExtensions(c); }},
-        {"Version1WithExtensions", "of version 1, and yet with extensions", "xxx xxx xxx", [](C& c, Chain&) { c.version = 1; }},
-        {"Version2WithExtensions", "of version 2, and yet with extensions", "xxx xxx xxx", [](C& c, Chain&) { c.version = 2; }},
-        {"Version4", "of a version that there is not", "xxx xxx xxx", [](C& c, Chain&) { c.version = 4; }},
-        {"SerialNegative", "a serial number of -1; no option asks for it", "444 444 444", [](C& c, Chain&) { c.serial = -1; }},
-        {"SerialZero", "a serial number of 0; no option asks for it", "444 444 444", [](C& c, Chain&) { c.serial = 0; }},
-        // Encodings of the certificate in the list.
-        {"BytesBehindIt", "a byte behind the certificate", "xxx xxx xxx", nullptr, [](Data& der) { der.push_back(std::byte{0}); }},
-        {"CutShort", "its last byte is missing", "xxx xxx xxx", nullptr, [](Data& der) { der.pop_back(); }},
-        {"Empty", "no byte of it is there", "xxx xxx xxx", nullptr, [](Data& der) { der.clear(); }},
-        {"ASetInsteadOfASequence", "its outer tag is that of a SET", "xxx xxx xxx", nullptr, [](Data& der) { der[0] = std::byte{0x31}; }},
-        {"LengthNotMinimal", "its length is written with a zero in front", "xxx xxx xxx", nullptr, lengthenLength},
-        {"LengthIndefinite", "its length is indefinite", "xxx xxx xxx", nullptr, makeIndefinite},
-        {"Longer", "longer than 131072 bytes", "xxx xxx xxx", [](C& c, Chain&) { replace(c, kUnknown, false, derElementOfSize(131072)); }},
-        // At the margin, and good.
-        {"KeyRsa2048", "nothing: 2048 bits are enough", "444 444 444", [](C& c, Chain&) { useKey(c, KeyKind::rsa2048); }},
-        {"KeyP384", "nothing: a longer curve", "444 444 444", [](C& c, Chain&) { useKey(c, KeyKind::p384); }},
-        {"SubjectKeyIdentifierMissing", "nothing: linkage is compared where both sides carry one", "444 444 444", [](C& c, Chain&) { c.subjectKeyIdentifier = KeyIdentifier::omitted(); }},
-        {"UnknownNotCritical", "nothing: an unknown extension that is not critical", "444 444 444", [](C& c, Chain&) { replace(c, kUnknown, false); }},
-        {"KeyUsageMissing", "nothing: a key usage that is not stated forbids nothing", "444 444 444", [](C& c, Chain&) { c.keyUsage.clear(); }},
-    };
-    return faults;
-}
-
 const std::vector<ChainFault>& chainFaults() {
     static const std::vector<ChainFault> faults{
         // Anchors.
@@ -343,6 +235,21 @@ const std::vector<ChainFault>& chainFaults() {
         {"LeafDeniedAndRenewed", "the user distrusts the leaf, which was issued again with its key", "3 3 3", nullptr, [](Scene& s, const Chain& f) { s.denied = {s.chain.leaf.der}; s.list[kLeaf] = renewed(s, f, kLeaf); }},
         {"IntermediateDeniedAndRenewed", "the user distrusts the intermediate, which was issued again with its key", "3 3 3", nullptr, [](Scene& s, const Chain& f) { s.denied = {s.chain.intermediate.der}; s.list[kIntermediate] = renewed(s, f, kIntermediate); }},
         {"RenewedRootDenied", "the user distrusts the root as it was issued again with its key", "3 3 3", nullptr, [](Scene& s, const Chain& f) { s.denied = {renewed(s, f, kRoot)}; }},
+        {"KeysDeniedUnderOtherNames", "the user distrusts certificates of these keys with other names", "3 3 3", nullptr, [](Scene& s, const Chain& f) { Chain other = f; for (C* one : {&other.root, &other.intermediate, &other.leaf}) one->subject = commonName("Other " + one->subject.back().second); s.denied = other.issue().list(); }},
+        {"LeafDeniedUnderAnotherName", "the user distrusts the leaf, whose key comes under another name", "3 3 3", nullptr, [](Scene& s, const Chain& f) { s.denied = {s.chain.leaf.der}; Chain other = f; other.leaf.subject = commonName("Another"); s.list[kLeaf] = issueCertificate(other.leaf, &s.chain.intermediate).der; }},
+        {"LeafDeniedAndCompressed", "the user distrusts the leaf, whose point comes compressed", "3 3 3", nullptr, [](Scene& s, const Chain& f) { s.denied = {s.chain.leaf.der}; s.list[kLeaf] = leafWithKey(s, f, compressedPoint); }},
+        {"LeafDeniedAndHybrid", "the user distrusts the leaf, whose point comes in the hybrid form", "3 3 3", nullptr, [](Scene& s, const Chain& f) { s.denied = {s.chain.leaf.der}; s.list[kLeaf] = leafWithKey(s, f, hybridPoint); }},
+        {"LeafDeniedOnADescribedCurve", "the user distrusts the leaf, whose curve comes by its numbers", "3 3 3", nullptr, [](Scene& s, const Chain& f) { s.denied = {s.chain.leaf.der}; s.list[kLeaf] = leafWithKey(s, f, onDescribedCurve); }},
+        {"LeafDeniedAsPss", "the user distrusts the leaf, whose RSA key comes as RSASSA-PSS", "3 3 3", [](Chain& c) { useKey(c.leaf, KeyKind::rsa2048); }, [](Scene& s, const Chain& f) { s.denied = {s.chain.leaf.der}; s.list[kLeaf] = leafWithKey(s, f, asPssKey); }},
+        {"CompressedLeafDenied", "the user distrusts the leaf's compressed form", "3 3 3", nullptr, [](Scene& s, const Chain& f) { s.denied = {leafWithKey(s, f, compressedPoint)}; }},
+        {"HybridLeafDenied", "the user distrusts the leaf's hybrid form", "3 3 3", nullptr, [](Scene& s, const Chain& f) { s.denied = {leafWithKey(s, f, hybridPoint)}; }},
+        {"LeafOnADescribedCurveDenied", "the user distrusts the leaf with its curve by numbers", "3 3 3", nullptr, [](Scene& s, const Chain& f) { s.denied = {leafWithKey(s, f, onDescribedCurve)}; }},
+        {"PssLeafDenied", "the user distrusts the leaf's RSA key as RSASSA-PSS", "3 3 3", [](Chain& c) { useKey(c.leaf, KeyKind::rsa2048); }, [](Scene& s, const Chain& f) { s.denied = {leafWithKey(s, f, asPssKey)}; }},
+        {"LeafOfVersion4Denied", "the user distrusts a certificate of the leaf's key that nobody can read", "3 3 3", nullptr, [](Scene& s, const Chain& f) { Chain other = f; other.leaf.version = 4; s.denied = {issueCertificate(other.leaf, &s.chain.intermediate).der}; }},
+        {"IntermediateDeniedAndCompressed", "the user distrusts the intermediate, whose point comes compressed", "3 3 3", nullptr, [](Scene& s, const Chain& f) { s.denied = {s.chain.intermediate.der}; Chain other = f; other.intermediate.edit = [](E& e) { e.key = compressedPoint(e.key); }; s.list[kIntermediate] = issueCertificate(other.intermediate, &s.chain.root).der; }},
+        // The search.
+        {"TooManyChains", "more chains than are looked at, none of which is anchored", "5 5 5", nullptr, [](Scene& s, const Chain& f) { s.roots.clear(); branchOut(s, f, 5, 3); }},
+        {"TooManySignatures", "more pairs of certificates than are checked", "5 5 5", nullptr, namesakes},
         // The clock.
         {"ClockBeforeEveryDate", "the clock stands in 1990; the ticket policy has no option on dates", "4 5 5", nullptr, [](Scene& s, const Chain&) { s.now = {631152000}; }},
         {"ClockBehindEveryDate", "the clock stands in 2060; the ticket policy has no option on dates", "4 5 5", nullptr, [](Scene& s, const Chain&) { s.now = {2840140800}; }},
@@ -377,6 +284,19 @@ const std::vector<ChainFault>& chainFaults() {
         {"NameForAnAddress", "the address is written as a DNS name", "- 5 5", [](Chain& c) { names(c, "DNS:192.0.2.1"); }, nullptr, "192.0.2.1"},
         {"AnotherAddress", "for another address", "- 5 5", [](Chain& c) { names(c, "IP:192.0.2.2"); }, nullptr, "192.0.2.1"},
         {"WildcardForAnAddress", "a wildcard does not cover an address", "- 5 5", [](Chain& c) { names(c, "DNS:*.0.2.1"); }, nullptr, "192.0.2.1"},
+        {"AddressExcluded", "an issuer excludes the address's range", "- 5 5", [](Chain& c) { names(c, "IP:192.0.2.1"); c.intermediate.nameConstraints = "excluded;IP:192.0.2.0/255.255.255.0"; }, nullptr, "192.0.2.1"},
+        {"AddressNotPermitted", "the root permits another range", "- 5 5", [](Chain& c) { names(c, "IP:192.0.2.1"); c.root.nameConstraints = "critical,permitted;IP:198.51.100.0/255.255.255.0"; }, nullptr, "192.0.2.1"},
+        {"AddressOfTheOtherLengthPermitted", "the root permits addresses of the other length alone", "- 5 5", [](Chain& c) { names(c, "IP:192.0.2.1"); c.root.nameConstraints = "permitted;IP:::/::"; }, nullptr, "192.0.2.1"},
+        {"AnotherNameExcluded", "a name besides the host is excluded", "- 5 5", [](Chain& c) { names(c, "DNS:api.lumora.example,DNS:evil.example"); c.root.nameConstraints = "permitted;DNS:lumora.example"; }},
+        {"AnAddressBesidesExcluded", "an address besides the host is excluded", "- 5 5", [](Chain& c) { names(c, "DNS:api.lumora.example,IP:192.0.2.1"); c.root.nameConstraints = "excluded;IP:0.0.0.0/0.0.0.0"; }},
+        {"WildcardOverAnExcludedName", "a wildcard covers a name that is excluded", "- 5 5", [](Chain& c) { names(c, "DNS:*.lumora.example"); c.root.nameConstraints = "excluded;DNS:www.lumora.example"; }},
+        {"WildcardOverTheExcludedHost", "a wildcard covers the host, which is excluded", "- 5 5", [](Chain& c) { names(c, "DNS:*.lumora.example"); c.root.nameConstraints = "excluded;DNS:api.lumora.example"; }},
+        {"WildcardWiderThanPermitted", "a wildcard covers more than the host that is permitted", "- 5 5", [](Chain& c) { names(c, "DNS:*.lumora.example"); c.root.nameConstraints = "permitted;DNS:api.lumora.example"; }},
+        {"NameOfTheIntermediateExcluded", "the root excludes a name of the intermediate", "- 5 5", [](Chain& c) { c.intermediate.subjectAlternativeNames = "DNS:evil.example"; c.root.nameConstraints = "permitted;DNS:lumora.example"; }},
+        {"NameWithNulBelowAConstraint", "a name with a NUL besides the host, below a constraint", "- 5 5", [](Chain& c) { c.leaf.subjectAlternativeNames.clear(); replace(c.leaf, kAlternativeNames, false, derElement(0x30, joined(derElement(kDnsName, foundation::asBytes(kHost)), derElement(kDnsName, foundation::asBytes(std::string_view("a\0.lumora.example", 17)))))); c.root.nameConstraints = "permitted;DNS:lumora.example"; }},
+        {"TooManyNames", "four thousand names below a thousand constraints", "- 5 5", [](Chain& c) { crossNames(c, 4000, 1000); }},
+        {"NameOfEightBits", "a DNS name that is not of 7-bit characters", "- 6 6", [](Chain& c) { rawName(c, kDnsName, "caf\xE9.example"); }},
+        {"NameOfAnUnknownForm", "a name of a form that there is not", "- 6 6", [](Chain& c) { rawName(c, 0x89, "api.lumora.example"); }},
         {"AddressAsCommonName", "the address is the common name and nowhere else", "- 5 5", [](Chain& c) { c.leaf.subject = commonName("192.0.2.1"); names(c, "DNS:localhost"); }, nullptr, "192.0.2.1"},
         {"MappedAddress", "the IPv4 address inside an IPv6 one", "- 5 5", [](Chain& c) { names(c, "IP:::ffff:192.0.2.1"); }, nullptr, "192.0.2.1"},
         {"AddressOf5Bytes", "an address of five bytes", "- 6 6", [](Chain& c) { rawName(c, kAddress, "abcde"); }},
@@ -391,10 +311,13 @@ const std::vector<ChainFault>& chainFaults() {
         {"Twins", "nothing: leaf and intermediate come as (r, n - s), which verifies", "4 4 4", nullptr, [](Scene& s, const Chain&) { s.list[kLeaf] = twin(s, kLeaf); s.list[kIntermediate] = twin(s, kIntermediate); }},
         {"Renewed", "nothing: leaf and intermediate were issued again", "4 4 4", nullptr, [](Scene& s, const Chain& f) { s.list[kLeaf] = renewed(s, f, kLeaf); s.list[kIntermediate] = renewed(s, f, kIntermediate); }},
         {"NamesakesDenied", "nothing: the user distrusts certificates of these names with other keys", "4 4 4", nullptr, [](Scene& s, const Chain& f) { s.denied = impostorOf(f).list(); }},
-        {"KeysDeniedUnderOtherNames", "nothing: the user distrusts certificates of these keys with other names", "4 4 4", nullptr, [](Scene& s, const Chain& f) { Chain other = f; for (C* one : {&other.root, &other.intermediate, &other.leaf}) one->subject = commonName("Other " + one->subject.back().second); s.denied = other.issue().list(); }},
         {"HostInCapitals", "nothing: names differ in case alone", "- 4 4", [](Chain& c) { names(c, "DNS:API.Lumora.Example"); }},
         {"Wildcard", "nothing: a wildcard for the first label", "- 4 4", [](Chain& c) { names(c, "DNS:*.lumora.example"); }},
         {"HostWithItsDot", "nothing: the host is asked for with the root's dot", "- 4 4", nullptr, nullptr, "api.lumora.example."},
+        {"ConstrainedToTheHost", "nothing: every issuer permits the host", "- 4 4", [](Chain& c) { c.root.nameConstraints = c.intermediate.nameConstraints = "critical,permitted;DNS:lumora.example,excluded;IP:0.0.0.0/0.0.0.0"; }},
+        {"ConstrainedLeaf", "nothing: a leaf constrains nobody", "- 4 4", [](Chain& c) { c.leaf.nameConstraints = "critical,excluded;DNS:lumora.example"; }},
+        {"KeyUsageForKeyEncipherment", "nothing: encipherment of keys is a use of TLS", "- 4 4", [](Chain& c) { useKey(c.leaf, KeyKind::rsa2048); c.leaf.keyUsage = "critical,keyEncipherment"; }},
+        {"PssChain", "nothing: every key is RSA, every signature RSASSA-PSS", "4 4 4", [](Chain& c) { everyKeyRsa(c); for (C* one : {&c.root, &c.intermediate, &c.leaf}) one->pss.emplace(); }},
         {"Address", "nothing: the address is the one", "- 4 4", [](Chain& c) { names(c, "IP:192.0.2.1"); }, nullptr, "192.0.2.1"},
     };
     return faults;

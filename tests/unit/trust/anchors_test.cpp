@@ -121,6 +121,125 @@ INSTANTIATE_TEST_SUITE_P(
                    "File too large"}),
     [](const auto& tested) { return std::string(tested.param.name); });
 
+// Distrust: a damaged block does not undo the others.
+
+std::string base64Of(const test::IssuedCertificate& certificate) {
+    const std::string pem = certificate.pem();
+    const std::size_t start = pem.find('\n') + 1;
+    return pem.substr(start, pem.find("-----END") - start);
+}
+
+std::string block(const std::string& body) {
+    return "-----BEGIN CERTIFICATE-----\n" + body + "-----END CERTIFICATE-----\n";
+}
+
+struct DamagedBlock {
+    const char* name;
+    std::function<std::string()> text;
+    const char* reason;
+
+    friend void PrintTo(const DamagedBlock& one, std::ostream* out) { *out << one.name; }
+};
+
+class DenyFile : public testing::TestWithParam<DamagedBlock> {};
+
+TEST_P(DenyFile, CountsWithItsOtherBlocksAndIsNamedInTheLog) {
+    const test::TemporaryDirectory directory;
+    const std::string path = directory / "user-trust/deny/bad.pem";
+    test::writeFile(path, chain().root.pem() + GetParam().text() + chain().leaf.pem());
+    const Loaded loaded = loadFrom(directory);
+    ASSERT_EQ(loaded.log.size(), 1U);
+    EXPECT_THAT(
+        loaded.log.front(),
+        testing::AllOf(testing::StartsWith("Could not read certificates. " + path),
+                       testing::HasSubstr("the block at line "), testing::HasSubstr(GetParam().reason)));
+    EXPECT_TRUE(loaded.anchors.denied.reaches(*X509Certificate::parse(chain().root.der)));
+    EXPECT_TRUE(loaded.anchors.denied.reaches(*X509Certificate::parse(chain().leaf.der)));
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    With, DenyFile,
+    testing::Values(
+        DamagedBlock{"NoBase64", [] { return block("MII*\n"); }, "not in base64"},
+        DamagedBlock{"ACutLine", [] { return block(base64Of(chain().intermediate).substr(1)); },
+                     "not in base64"},
+        DamagedBlock{"NoCertificate", [] { return test::toPem("CERTIFICATE", asBytes("not DER")); },
+                     "it is no certificate"},
+        DamagedBlock{"BytesLeftOver",
+                     [] {
+                         Data longer = chain().intermediate.der;
+                         longer.push_back(std::byte{0});
+                         return test::toPem("CERTIFICATE", longer);
+                     },
+                     "no proper certificate; its key is distrusted"},
+        DamagedBlock{"HalfACertificate",
+                     [] { return test::toPem("CERTIFICATE", ByteView(chain().intermediate.der).first(100)); },
+                     "it is no certificate"},
+        DamagedBlock{"NoEndLine",
+                     [] { return "-----BEGIN CERTIFICATE-----\n" + base64Of(chain().intermediate); },
+                     "end is missing"},
+        DamagedBlock{"NoFirstLine",
+                     [] { return base64Of(chain().intermediate) + "-----END CERTIFICATE-----\n"; },
+                     "an end and no beginning"},
+        DamagedBlock{"AnEndOfAnotherLabel",
+                     [] {
+                         return "-----BEGIN CERTIFICATE-----\n" + base64Of(chain().intermediate) +
+                                "-----BEGIN X-----\n-----END X-----\n";
+                     },
+                     "end is missing"}),
+    [](const auto& tested) { return tested.param.name; });
+
+TEST(DenyFile, MayEndInsideABlock) {
+    const test::TemporaryDirectory directory;
+    const std::string cut = chain().root.pem();
+    test::writeFile(directory / "user-trust/deny/a.pem", chain().leaf.pem() + cut.substr(0, cut.size() / 2));
+    const Loaded loaded = loadFrom(directory);
+    EXPECT_EQ(loaded.log.size(), 1U);
+    EXPECT_TRUE(loaded.anchors.denied.reaches(*X509Certificate::parse(chain().leaf.der)));
+}
+
+TEST(DenyFile, NamesEveryDamagedBlockUpToABound) {
+    const auto linesFor = [](int blocks) {
+        const test::TemporaryDirectory directory;
+        std::string text = chain().root.pem();
+        for (int i = 0; i < blocks; ++i) text += block("*\n");
+        test::writeFile(directory / "user-trust/deny/a.pem", text);
+        const Loaded loaded = loadFrom(directory);
+        EXPECT_EQ(loaded.anchors.denied.size(), 1U);
+        return loaded.log;
+    };
+    EXPECT_EQ(linesFor(16).size(), 16U);
+    EXPECT_EQ(linesFor(1000).size(), 17U);
+    EXPECT_THAT(linesFor(1000).back(), testing::HasSubstr("984 more blocks are damaged"));
+}
+
+TEST(DenyFile, HasNoLimitOnItsCertificates) {
+    const test::TemporaryDirectory directory;
+    std::string text;
+    for (std::size_t i = 0; i < kMaximumCertificatesPerFile; ++i) text += chain().root.pem();
+    test::writeFile(directory / "user-trust/deny/a.pem", text + chain().leaf.pem());
+    const Loaded loaded = loadFrom(directory);
+    EXPECT_THAT(loaded.log, testing::IsEmpty());
+    EXPECT_TRUE(loaded.anchors.denied.reaches(*X509Certificate::parse(chain().leaf.der)));
+}
+
+TEST(DenyFile, MayHoldWhatOpensslCallsTrusted) {
+    const test::TemporaryDirectory directory;
+    Data trusted = chain().leaf.der;
+    foundation::append(trusted, Data{std::byte{0x30}, std::byte{0}});
+    test::writeFile(directory / "user-trust/deny/a.pem", test::toPem("TRUSTED CERTIFICATE", trusted));
+    EXPECT_TRUE(loadFrom(directory).anchors.denied.reaches(*X509Certificate::parse(chain().leaf.der)));
+}
+
+TEST(AnchorFile, ThatIsTrustedCountsForNothingWithADamagedBlock) {
+    const test::TemporaryDirectory directory;
+    for (const char* store : {"roots", "compat-roots", "user-trust/allow"})
+        test::writeFile(directory / (std::string(store) + "/a.pem"), chain().root.pem() + block("*\n"));
+    const Loaded loaded = loadFrom(directory);
+    EXPECT_EQ(loaded.log.size(), 3U);
+    EXPECT_THAT(loaded.counts(), testing::Each(0));
+}
+
 TEST(AnchorStore, PassesOverOtherNames) {
     const test::TemporaryDirectory directory;
     for (const char* name : {"README", "a.crt", "a.pem.old"})

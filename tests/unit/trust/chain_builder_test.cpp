@@ -1,7 +1,7 @@
 #include "trust/chain_builder.h"
 
 #include <gtest/gtest.h>
-#include <openssl/x509.h>
+#include <openssl/evp.h>
 
 #include <atomic>
 
@@ -13,14 +13,15 @@ std::atomic<std::size_t> signatureChecks = 0;
 
 }  // namespace
 
-// The linker sends every call of X509_verify here (ld's --wrap).
+// The linker sends every call of EVP_DigestVerify here (ld's --wrap).
 extern "C" {
 // NOLINTBEGIN: reserved names that are not ours to choose
-int __real_X509_verify(X509* certificate, EVP_PKEY* key);
-int __wrap_X509_verify(X509* certificate, EVP_PKEY* key);
-int __wrap_X509_verify(X509* certificate, EVP_PKEY* key) {
+using Bytes = const unsigned char*;
+int __real_EVP_DigestVerify(EVP_MD_CTX* context, Bytes signature, size_t size, Bytes message, size_t length);
+int __wrap_EVP_DigestVerify(EVP_MD_CTX* context, Bytes signature, size_t size, Bytes message, size_t length);
+int __wrap_EVP_DigestVerify(EVP_MD_CTX* context, Bytes signature, size_t size, Bytes message, size_t length) {
     ++signatureChecks;
-    return __real_X509_verify(certificate, key);
+    return __real_EVP_DigestVerify(context, signature, size, message, length);
 }
 // NOLINTEND
 }
@@ -131,16 +132,120 @@ TEST(ChainBuilder, MakesNoMoreSignatureChecksThanItsLimit) {
     }
     const CertificateList noAnchors;
     const Anchors nothing;
-    ChainBuilder builder(list, noAnchors, nothing);
-    std::size_t shown = 0;
+    SignatureChecks checks;
+    ChainBuilder builder(list, noAnchors, nothing, checks);
     signatureChecks = 0;
-    builder.build([&](const CandidateChain& chain) {
-        EXPECT_TRUE(chain.badSignature) << "what was not checked does not verify";
-        ++shown;
-        return false;
-    });
-    EXPECT_GT(shown, 0U);
+    builder.build([](const CandidateChain&) { return false; });
+    EXPECT_TRUE(builder.isExhausted());
     EXPECT_EQ(signatureChecks, 256U);
+    ChainBuilder(list, noAnchors, nothing, checks).build([](const CandidateChain&) { return false; });
+    EXPECT_EQ(signatureChecks, 256U) << "the bound is one for all searches of a list";
+}
+
+TEST(ChainBuilder, MakesNoCheckBehindTheChainThatItFinds) {
+    Scene scene{test::TicketChain()};
+    test::TicketChain impostor;
+    for (int i = 0; i < 40; ++i) {
+        impostor.intermediate.key = SigningKey::cached(KeyKind::p256, "same" + std::to_string(i));
+        scene.list.push_back(issueCertificate(impostor.intermediate, &scene.chain.root).der);
+    }
+    signatureChecks = 0;
+    EXPECT_EQ(scene.verdict(ticketPolicy()), Verdict::unspecified);
+    EXPECT_EQ(signatureChecks, 2U) << "key identifiers lead the way";
+}
+
+// Searches that end at a bound.
+
+constexpr const char* kGivenUp =
+    "the search for a chain was given up, since the certificates allow too many or too long chains";
+
+/// A leaf below levels of certificates, each of which could have issued each of the level below: the same
+/// name and key under several serial numbers.
+Scene ladder(int levels, int width) {
+    Scene scene{test::TicketChain()};
+    scene.list.clear();
+    CertificateFields top = authority("top", "top");
+    IssuedCertificate above = issueCertificate(top, nullptr);
+    for (int level = 0; level < levels; ++level) {
+        const std::string name = "level " + std::to_string(level);
+        IssuedCertificate issued = above;
+        for (int i = 0; i < width; ++i) {
+            issued = issueCertificate(authority(name, name, i + 1), &above);
+            scene.list.push_back(issued.der);
+        }
+        above = issued;
+    }
+    scene.list.insert(scene.list.begin(), issueCertificate(CertificateFields{}, &above).der);
+    return scene;
+}
+
+/// More certificates of one name than there may be checks.
+Scene thicket() {
+    Scene scene{test::TicketChain()};
+    CertificateFields fields = authority("Same", "same0");
+    fields.subjectKeyIdentifier = fields.authorityKeyIdentifier = test::KeyIdentifier::omitted();
+    scene.list.clear();
+    for (std::size_t i = 0; i < kMaximumCertificates; ++i) {
+        fields.key = SigningKey::cached(KeyKind::p256, "same" + std::to_string(i));
+        fields.signer =
+            SigningKey::cached(KeyKind::p256, "same" + std::to_string((i + 1) % kMaximumCertificates));
+        fields.issuer = fields.subject;
+        scene.list.push_back(issueCertificate(fields, nullptr).der);
+    }
+    return scene;
+}
+
+/// One issuer above the other, without an anchor.
+Scene tower(std::size_t height) {
+    Scene scene{test::TicketChain()};
+    scene.list.clear();
+    IssuedCertificate above = issueCertificate(authority("0", "0"), nullptr);
+    for (std::size_t i = 1; i < height; ++i) {
+        above = issueCertificate(authority(std::to_string(i), std::to_string(i)), &above);
+        scene.list.insert(scene.list.begin(), above.der);
+    }
+    return scene;
+}
+
+struct Bounded {
+    const char* name;
+    std::function<Scene()> make;
+};
+
+class ExhaustedSearch : public testing::TestWithParam<Bounded> {};
+
+TEST_P(ExhaustedSearch, SaysThatAndNamesNoOtherCause) {
+    const Scene scene = GetParam().make();
+    const auto trust = scene.trust(anchorOnly());
+    Verdict verdict{};
+    ASSERT_EQ(trust->evaluate(verdict), kSuccess);
+    EXPECT_EQ(verdict, Verdict::recoverableFailure);
+    EXPECT_TRUE(trust->copyFailureDescription().value_or("").ends_with(kGivenUp))
+        << trust->copyFailureDescription().value_or("");
+    ASSERT_EQ(trust->copyProperties().size(), 1U);
+    EXPECT_EQ(trust->copyProperties()[0]["error"], foundation::Value(kGivenUp));
+}
+
+TEST_P(ExhaustedSearch, FindsALeafThatIsDistrustedAllTheSame) {
+    Scene scene = GetParam().make();
+    scene.denied = {scene.list.front()};
+    EXPECT_EQ(scene.verdict(anchorOnly()), Verdict::deny);
+}
+
+INSTANTIATE_TEST_SUITE_P(Of, ExhaustedSearch,
+                         testing::Values(Bounded{"Checks", thicket},
+                                         Bounded{"Chains", [] { return ladder(5, 3); }},
+                                         Bounded{"Length", [] { return tower(kMaximumChainLength + 3); }}),
+                         [](const auto& tested) { return tested.param.name; });
+
+TEST(CompleteSearch, NamesItsCause) {
+    for (const Scene& scene : {ladder(3, 3), tower(kMaximumChainLength)}) {
+        const auto trust = scene.trust(anchorOnly());
+        Verdict verdict{};
+        trust->evaluate(verdict);
+        EXPECT_EQ(verdict, Verdict::recoverableFailure);
+        EXPECT_FALSE(trust->copyFailureDescription().value_or("").ends_with(kGivenUp));
+    }
 }
 
 TEST(ChainBuilder, GoesNoFurtherThanItsLimit) {

@@ -4,6 +4,8 @@
 
 #include <string>
 
+#include "elements.h"
+
 namespace pinwell::trust::der {
 namespace {
 
@@ -11,12 +13,6 @@ using foundation::asBytes;
 using foundation::Data;
 using foundation::toData;
 using namespace std::string_literals;
-
-Data bytes(std::initializer_list<unsigned> values) {
-    Data data;
-    for (const unsigned value : values) data.push_back(static_cast<std::byte>(value));
-    return data;
-}
 
 std::optional<Element> element(const Data& data) {
     return readElement(data);

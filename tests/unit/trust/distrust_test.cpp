@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include "scene.h"
+#include "support/key_forms.h"
 
 namespace pinwell::trust {
 namespace {
@@ -91,13 +92,67 @@ TEST_P(Distrust, HoldsForAKeyThatCannotBeReadHoweverTheSignatureIsEncoded) {
     EXPECT_EQ(described.verdict(GetParam().policy), Verdict::deny);
 }
 
-TEST_P(Distrust, IsOfThisKeyUnderThisName) {
-    CertificateFields sameName = fields.leaf;
-    sameName.key = SigningKey::cached(KeyKind::p256, "namesake");
-    EXPECT_EQ(verdictWithout(issueCertificate(sameName, &intermediate).der), Verdict::unspecified);
-    CertificateFields sameKey = fields.leaf;
-    sameKey.subject = test::commonName("Another");
-    EXPECT_EQ(verdictWithout(issueCertificate(sameKey, &intermediate).der), Verdict::unspecified);
+TEST_P(Distrust, HoldsUnderAnotherSubject) {
+    CertificateFields renamed = fields.leaf;
+    renamed.subject = test::commonName("Another");
+    EXPECT_EQ(verdictWithout(issueCertificate(renamed, &intermediate).der), Verdict::deny);
+    scene.list.front() = issueCertificate(renamed, &intermediate).der;
+    EXPECT_EQ(verdictWithout(leaf.der), Verdict::deny);
+}
+
+TEST_P(Distrust, IsNotOfANamesake) {
+    CertificateFields namesake = fields.leaf;
+    namesake.key = SigningKey::cached(KeyKind::p256, "namesake");
+    EXPECT_EQ(verdictWithout(issueCertificate(namesake, &intermediate).der), Verdict::unspecified);
+}
+
+/// A leaf whose key is written in another way, and another name and serial number besides.
+Data inAnotherForm(const ChainFields& fields, const IssuedCertificate& issuer, Data (*form)(ByteView)) {
+    CertificateFields odd = fields.leaf;
+    odd.subject = test::commonName("Another");
+    odd.serial += 100;
+    odd.edit = [form](test::CertificateElements& all) { all.key = form(all.key); };
+    return issueCertificate(odd, &issuer).der;
+}
+
+TEST_P(Distrust, HoldsForThePointInEveryForm) {
+    for (const auto form : {test::compressedPoint, test::hybridPoint, test::onDescribedCurve}) {
+        const Data odd = inAnotherForm(fields, intermediate, form);
+        scene.list.front() = leaf.der;
+        EXPECT_EQ(verdictWithout(odd), Verdict::deny) << "the deny file holds the odd form";
+        scene.list.front() = odd;
+        EXPECT_EQ(verdictWithout(leaf.der), Verdict::deny) << "the chain holds the odd form";
+    }
+}
+
+TEST_P(Distrust, HoldsForAnRsaKeyUnderPss) {
+    fields.leaf.key = SigningKey::cached(KeyKind::rsa2048, "leaf");
+    Scene rsa(fields);
+    const Data odd = inAnotherForm(fields, intermediate, test::asPssKey);
+    const Data ordinary = rsa.list.front();
+    rsa.denied = {odd};
+    EXPECT_EQ(rsa.verdict(GetParam().policy), Verdict::deny);
+    rsa.list.front() = odd;
+    rsa.denied = {ordinary};
+    EXPECT_EQ(rsa.verdict(GetParam().policy), Verdict::deny);
+}
+
+TEST_P(Distrust, HoldsForTheKeyOfAnAuthorityInEveryForm) {
+    for (const auto form : {test::compressedPoint, test::hybridPoint, test::onDescribedCurve}) {
+        CertificateFields odd = fields.intermediate;
+        odd.edit = [form](test::CertificateElements& all) { all.key = form(all.key); };
+        EXPECT_EQ(verdictWithout(issueCertificate(odd, &root).der), Verdict::deny);
+    }
+}
+
+TEST_P(Distrust, HoldsForTheKeyOfACertificateThatIsRefused) {
+    for (const int version : {1, 4}) {
+        CertificateFields refused = fields.leaf;
+        refused.version = version;
+        const Data der = issueCertificate(refused, &intermediate).der;
+        ASSERT_EQ(X509Certificate::parse(der), nullptr);
+        EXPECT_EQ(verdictWithout(der), Verdict::deny);
+    }
 }
 
 INSTANTIATE_TEST_SUITE_P(Of, Distrust, testing::ValuesIn(everyPolicy()),

@@ -2,22 +2,24 @@
 
 #include <gtest/gtest.h>
 
+#include "elements.h"
+
 namespace pinwell::trust {
 namespace {
 
 using foundation::Data;
 
-struct Row {
+struct HostRow {
     const char* title;
     std::string presented;
     std::string host;
     bool covers;
 };
 
-class DnsName : public testing::TestWithParam<Row> {};
+class DnsName : public testing::TestWithParam<HostRow> {};
 
 TEST_P(DnsName, IsMatchedAsStated) {
-    const Row& row = GetParam();
+    const HostRow& row = GetParam();
     EXPECT_EQ(coversHost({{row.presented}, {}}, row.host), row.covers)
         << row.presented << " for " << row.host;
 }
@@ -25,43 +27,37 @@ TEST_P(DnsName, IsMatchedAsStated) {
 INSTANTIATE_TEST_SUITE_P(
     HostName, DnsName,
     testing::Values(
-        Row{"Same", "api.lumora.example", "api.lumora.example", true},
-        Row{"OtherCase", "API.Lumora.example", "api.lumora.EXAMPLE", true},
-        Row{"DotAtTheHostsEnd", "api.lumora.example", "api.lumora.example.", true},
-        Row{"TwoDotsAtTheHostsEnd", "api.lumora.example", "api.lumora.example..", false},
-        Row{"DotAtThePresentedEnd", "api.lumora.example.", "api.lumora.example", false},
-        Row{"SingleLabel", "localhost", "localhost", true},
-        Row{"OtherName", "www.lumora.example", "api.lumora.example", false},
-        Row{"ParentDoesNotCoverChild", "lumora.example", "api.lumora.example", false},
-        Row{"ChildDoesNotCoverParent", "api.lumora.example", "lumora.example", false},
-        Row{"SuffixOfALabel", "api.lumora.example", "xapi.lumora.example", false},
-        Row{"Wildcard", "*.lumora.example", "api.lumora.example", true},
-        Row{"WildcardAndTrailingDot", "*.lumora.example", "api.lumora.example.", true},
-        Row{"WildcardTwoLabelsDeep", "*.lumora.example", "a.api.lumora.example", false},
-        Row{"WildcardNotTheParent", "*.lumora.example", "lumora.example", false},
-        Row{"WildcardNotLeftmost", "api.*.example", "api.lumora.example", false},
-        Row{"WildcardPartOfALabel", "a*.lumora.example", "api.lumora.example", false},
-        Row{"WildcardTwice", "*.*.example", "api.lumora.example", false},
-        Row{"WildcardOverATopLevel", "*.example", "lumora.example", false},
-        Row{"WildcardAlone", "*", "localhost", false},
-        Row{"WildcardForAnAddress", "*.0.0.1", "127.0.0.1", false},
-        Row{"AddressWrittenAsDnsName", "127.0.0.1", "127.0.0.1", false},
-        Row{"ZeroByteInThePresentedName", std::string("api.lumora.example\0.evil.example", 31),
-            "api.lumora.example", false},
-        Row{"ZeroByteInTheHost", "api.lumora.example", std::string("api.lumora.example\0", 19), false},
-        Row{"EmptyHost", "", "", false}, Row{"DotAlone", ".", ".", false},
-        Row{"WildcardAsHost", "*.lumora.example", "*.lumora.example", false},
-        Row{"LabelTooLong", std::string(64, 'a') + ".example", std::string(64, 'a') + ".example", false}),
+        HostRow{"Same", "api.lumora.example", "api.lumora.example", true},
+        HostRow{"OtherCase", "API.Lumora.example", "api.lumora.EXAMPLE", true},
+        HostRow{"DotAtTheHostsEnd", "api.lumora.example", "api.lumora.example.", true},
+        HostRow{"TwoDotsAtTheHostsEnd", "api.lumora.example", "api.lumora.example..", false},
+        HostRow{"DotAtThePresentedEnd", "api.lumora.example.", "api.lumora.example", false},
+        HostRow{"SingleLabel", "localhost", "localhost", true},
+        HostRow{"OtherName", "www.lumora.example", "api.lumora.example", false},
+        HostRow{"ParentDoesNotCoverChild", "lumora.example", "api.lumora.example", false},
+        HostRow{"ChildDoesNotCoverParent", "api.lumora.example", "lumora.example", false},
+        HostRow{"SuffixOfALabel", "api.lumora.example", "xapi.lumora.example", false},
+        HostRow{"Wildcard", "*.lumora.example", "api.lumora.example", true},
+        HostRow{"WildcardAndTrailingDot", "*.lumora.example", "api.lumora.example.", true},
+        HostRow{"WildcardTwoLabelsDeep", "*.lumora.example", "a.api.lumora.example", false},
+        HostRow{"WildcardNotTheParent", "*.lumora.example", "lumora.example", false},
+        HostRow{"WildcardNotLeftmost", "api.*.example", "api.lumora.example", false},
+        HostRow{"WildcardPartOfALabel", "a*.lumora.example", "api.lumora.example", false},
+        HostRow{"WildcardTwice", "*.*.example", "api.lumora.example", false},
+        HostRow{"WildcardOverATopLevel", "*.example", "lumora.example", false},
+        HostRow{"WildcardAlone", "*", "localhost", false},
+        HostRow{"WildcardForAnAddress", "*.0.0.1", "127.0.0.1", false},
+        HostRow{"AddressWrittenAsDnsName", "127.0.0.1", "127.0.0.1", false},
+        HostRow{"ZeroByteInThePresentedName", std::string("api.lumora.example\0.evil.example", 31),
+                "api.lumora.example", false},
+        HostRow{"ZeroByteInTheHost", "api.lumora.example", std::string("api.lumora.example\0", 19), false},
+        HostRow{"EmptyHost", "", "", false}, HostRow{"DotAlone", ".", ".", false},
+        HostRow{"WildcardAsHost", "*.lumora.example", "*.lumora.example", false},
+        HostRow{"LabelTooLong", std::string(64, 'a') + ".example", std::string(64, 'a') + ".example", false}),
     [](const auto& row) { return row.param.title; });
 
-Data address(std::initializer_list<unsigned> values) {
-    Data data;
-    for (const unsigned value : values) data.push_back(static_cast<std::byte>(value));
-    return data;
-}
-
 const AlternativeNames kLoopback{
-    {}, {address({127, 0, 0, 1}), address({0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 1})}};
+    {}, {bytes({127, 0, 0, 1}), bytes({0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 1})}};
 
 TEST(HostAddress, IsMatchedByteForByte) {
     EXPECT_TRUE(coversHost(kLoopback, "127.0.0.1"));

@@ -1,8 +1,6 @@
 // The published ECDSA signatures of RFC 6979, A.2.5 (P-256, SHA-256), and how signatures are put together.
 #pragma once
 
-#include <openssl/x509.h>
-
 #include <string>
 #include <string_view>
 
@@ -39,9 +37,7 @@ inline X509PublicKey sampleKey() {
                           .bytes(fromHex(kPublicX))
                           .bytes(fromHex(kPublicY))
                           .data();
-    const auto* at = static_cast<const unsigned char*>(static_cast<const void*>(info.data()));
-    return X509PublicKey(
-        std::shared_ptr<EVP_PKEY>(d2i_PUBKEY(nullptr, &at, static_cast<long>(info.size())), EVP_PKEY_free));
+    return *X509PublicKey::fromSubjectPublicKeyInfo(info);
 }
 
 inline Data element(std::uint8_t tag, const Data& contents) {

@@ -46,7 +46,9 @@ struct Scene {
                 if (auto certificate = X509Certificate::parse(der)) certificates.push_back(certificate);
             return certificates;
         };
-        const Anchors anchors{parse(roots), parse(compatibility), parse(allowed), parse(denied)};
+        Anchors anchors{parse(roots), parse(compatibility), parse(allowed), parse(denied)};
+        for (const Data& der : denied)
+            if (X509Certificate::parse(der) == nullptr) anchors.denied.addUnreadable(der);
         return makeTrustService([anchors] { return anchors; }, [time = now] { return time; });
     }
 

@@ -23,7 +23,11 @@
  *   BasicConstraints         boolean                         each issuer is a CA, within its path length
  *   NonEmptySubject          boolean                         no subject name is empty
  *   ValidityDates            boolean                         no certificate has expired, or is not valid yet
- *   ServerAuthentication     boolean                         the leaf's extended key usage names servers
+ *   ServerAuthentication     boolean                         the leaf's extended key usage names servers, an
+ *                                                            issuer's too, or any purpose, where it has one; the
+ *                                                            leaf's key usage, where it has one, allows TLS
+ *   NameConstraints          boolean                         the host and all names keep to the issuers' name
+ *                                                            constraints
  *   PlatformAnchor           number dictionary, empty        the chain ends at one of the platform's own roots;
  *                                                            also when no anchor option is given
  *   CompatibilityAnchor      number dictionary, empty        the same, or at a compatibility root

@@ -1,0 +1,50 @@
+// A public key that can verify, and the signatures of certificates that it verifies. OpenSSL computes; it is
+// given numbers, points and names that `readSubjectKey` has read, and no encoding of them to interpret.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <string_view>
+
+#include "trust/signature_algorithm.h"
+#include "trust/subject_key.h"
+#include "trust/trust.h"
+
+struct evp_pkey_st;  // OpenSSL's EVP_PKEY
+
+namespace pinwell::trust {
+
+/// Immutable once it is made; any thread may use it.
+class X509PublicKey final : public PublicKey {
+  public:
+    /// Null if the key is `unusable`, or its point is not on its curve.
+    static std::shared_ptr<const X509PublicKey> make(const SubjectKey& key);
+
+    /// The same from a whole SubjectPublicKeyInfo in DER.
+    static std::shared_ptr<const X509PublicKey> fromSubjectPublicKeyInfo(ByteView der);
+
+    evp_pkey_st* native() const noexcept { return key_.get(); }
+
+    /// kKeyTypeRSA, kKeyTypeEllipticCurve, or empty for any other kind.
+    std::string_view type() const noexcept;
+    std::size_t bits() const noexcept { return description_.bits; }
+
+    /// OpenSSL's name; of an elliptic-curve key alone.
+    std::string_view curve() const noexcept { return description_.curve; }
+
+    /// Whether the key verifies a certificate's signature. False for an algorithm that is unknown or not the
+    /// key's own, for ECDSA signatures that are not in strict DER, and for signatures of the wrong length.
+    bool verifies(const SignatureAlgorithm& algorithm, ByteView message, ByteView signature) const;
+
+  private:
+    X509PublicKey(SubjectKey description, std::shared_ptr<evp_pkey_st> key)
+        : description_(std::move(description)), key_(std::move(key)) {}
+
+    bool isFor(const SignatureAlgorithm& algorithm) const;
+    bool hasProperLength(const SignatureAlgorithm& algorithm, ByteView signature) const;
+
+    SubjectKey description_;
+    std::shared_ptr<evp_pkey_st> key_;
+};
+
+}  // namespace pinwell::trust
