@@ -86,6 +86,13 @@ Data AdHocSignature::codeDirectory() const {
     return std::move(directory).take();
 }
 
+Data AdHocSignature::codeHash() const {
+    constexpr std::size_t kCodeHashSize = 20;
+    Data hash = sha256(codeDirectory());
+    hash.resize(kCodeHashSize);
+    return hash;
+}
+
 Data AdHocSignature::superblob() const {
     const std::array<std::pair<std::uint32_t, Data>, 3> blobs{{
         {kCodeDirectorySlot, codeDirectory()},

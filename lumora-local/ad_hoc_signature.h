@@ -28,6 +28,9 @@ struct AdHocSignature {
     /// Its length depends on the identifier, the length of the code and the highest slot alone.
     foundation::Data superblob() const;
 
+    /// The code hash: 20 bytes.
+    foundation::Data codeHash() const;
+
   private:
     foundation::Data codeDirectory() const;
 };

@@ -88,6 +88,10 @@ void makeDirectory(const std::string& path, mode_t mode) {
     if (::mkdir(path.c_str(), mode) != 0) throw failureFromErrno(EX_CANTCREAT, "create", path);
 }
 
+void makeLink(const std::string& path, const std::string& target) {
+    if (::symlink(target.c_str(), path.c_str()) != 0) throw failureFromErrno(EX_CANTCREAT, "create", path);
+}
+
 void flushDirectory(const std::string& path) {
     constexpr int kFlags = O_RDONLY | O_DIRECTORY | O_CLOEXEC;
     const FileDescriptor directory(uninterrupted([&] { return ::open(path.c_str(), kFlags); }));

@@ -21,6 +21,9 @@ void replaceFile(const std::string& path, foundation::ByteView contents, mode_t 
 /// Makes one directory that must not exist yet. Throws Failure.
 void makeDirectory(const std::string& path, mode_t mode);
 
+/// Makes a symbolic link that must not exist yet. Throws Failure.
+void makeLink(const std::string& path, const std::string& target);
+
 /// Flushes a directory, so that the names in it survive a crash. Throws Failure.
 void flushDirectory(const std::string& path);
 

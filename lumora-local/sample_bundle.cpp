@@ -1,10 +1,13 @@
 #include "lumora-local/sample_bundle.h"
 
+#include <map>
+
 #include "foundation/byte_writer.h"
 #include "foundation/format.h"
 #include "lumora-local/ad_hoc_signature.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/property_list_document.h"
+#include "lumora-local/resource_seal.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -16,6 +19,10 @@ using foundation::Dictionary;
 
 constexpr std::string_view kName = "Sample";
 constexpr std::string_view kBundleIdentifier = "example.lumora.sample";
+constexpr std::string_view kFramework = "Greeting";
+constexpr std::string_view kTool = "sample-tool";
+constexpr std::string_view kApplicationReadMe = "A sample application, to try a record service with.\n";
+constexpr std::string_view kGreeting = "Hello.\n";
 
 // Executable image. The text segment is one alignment unit long; the signature follows it.
 constexpr std::uint32_t kImageMagic64 = 0xFEEDFACF;
@@ -103,21 +110,38 @@ Data textSegment(std::uint32_t cpuType, std::uint32_t signatureSize) {
 
 }  // namespace
 
-Data makeSignedImage(std::uint32_t cpuType, const std::string& identifier,
-                     const SealedComponents& components) {
+namespace {
+
+struct SignedImage {
+    Data bytes;
+    Data codeHash;
+};
+
+SignedImage signedImage(std::uint32_t cpuType, const std::string& identifier,
+                        const SealedComponents& components) {
+    std::map<std::uint32_t, Data> slots;
+    if (!components.informationPropertyList.empty()) slots.emplace(1, components.informationPropertyList);
+    if (!components.resourceSeal.empty()) slots.emplace(3, components.resourceSeal);
     const auto signatureOf = [&](ByteView code) {
         return AdHocSignature{
-            .identifier = identifier,
-            .code = code,
-            .components = {{1, components.informationPropertyList}, {3, components.resourceSeal}},
-            .isMainProgram = true};
+            .identifier = identifier, .code = code, .components = slots, .isMainProgram = true};
     };
     // The load command gives the signature's length, and its digests cover the load command.
     const Data placeholder(kAlignment);
     const std::size_t size = signatureOf(placeholder).superblob().size();
     Data image = textSegment(cpuType, static_cast<std::uint32_t>(size));
-    foundation::append(image, signatureOf(image).superblob());
-    return image;
+    const AdHocSignature signature = signatureOf(image);
+    const Data superblob = signature.superblob();
+    Data codeHash = signature.codeHash();
+    foundation::append(image, superblob);
+    return {std::move(image), std::move(codeHash)};
+}
+
+}  // namespace
+
+Data makeSignedImage(std::uint32_t cpuType, const std::string& identifier,
+                     const SealedComponents& components) {
+    return signedImage(cpuType, identifier, components).bytes;
 }
 
 Data makeUniversalImage(const std::vector<std::pair<std::uint32_t, Data>>& slices) {
@@ -138,29 +162,93 @@ Data makeUniversalImage(const std::vector<std::pair<std::uint32_t, Data>>& slice
     return std::move(header).take();
 }
 
+namespace {
+
+/// A universal image of a slice for each processor.
+struct Program {
+    Data image;
+    std::vector<Data> codeHashes;  // that of the slice which stands for all first
+};
+
+Program makeProgram(const std::string& identifier, const SealedComponents& components) {
+    SignedImage intel = signedImage(kCpuTypeX86_64, identifier, components);
+    SignedImage arm = signedImage(kCpuTypeArm64, identifier, components);
+    return {makeUniversalImage({{kCpuTypeX86_64, intel.bytes}, {kCpuTypeArm64, arm.bytes}}),
+            {arm.codeHash, intel.codeHash}};
+}
+
+Data information(const std::string& name, const std::string& identifier, const char* type) {
+    return propertyListDocument({{"CFBundleExecutable", name},
+                                 {"CFBundleIdentifier", identifier},
+                                 {"CFBundleName", name},
+                                 {"CFBundlePackageType", type},
+                                 {"CFBundleVersion", "1"}});
+}
+
+/// Writes the framework, and has the seal of what it is in name it.
+void writeFramework(const std::string& frameworks, ResourceSeal& outer) {
+    const std::string name(kFramework);
+    const std::string identifier = std::string(kBundleIdentifier) + ".greeting";
+    const Data list = information(name, identifier, "FMWK");
+    ResourceSeal seal;
+    seal.addFile("Resources/Info.plist", list);
+    seal.addFile("Resources/Greeting.txt", foundation::asBytes(kGreeting));
+    const SealedComponents components{.informationPropertyList = list, .resourceSeal = seal.document()};
+    const Program program = makeProgram(identifier, components);
+    outer.addNestedCode("Frameworks/" + name + ".framework", program.codeHashes);
+
+    const std::string framework = frameworks + "/" + name + ".framework";
+    const std::string version = framework + "/Versions/A";
+    for (const std::string& directory :
+         {framework, framework + "/Versions", version, version + "/Resources", version + "/_CodeSignature"})
+        makeDirectory(directory, 0755);
+    writeNewFile(version + "/" + name, program.image, 0755);
+    writeNewFile(version + "/Resources/Info.plist", list, 0644);
+    writeNewFile(version + "/Resources/Greeting.txt", foundation::asBytes(kGreeting), 0644);
+    writeNewFile(version + "/_CodeSignature/CodeResources", components.resourceSeal, 0644);
+    makeLink(framework + "/Versions/Current", "A");
+    for (const std::string& entry : {name, std::string("Resources")})
+        makeLink(framework + "/" + entry, "Versions/Current/" + entry);
+}
+
+void writeResources(const std::string& resources, ResourceSeal& seal) {
+    makeDirectory(resources, 0755);
+    makeDirectory(resources + "/en.lproj", 0755);
+    writeNewFile(resources + "/ReadMe.txt", foundation::asBytes(kApplicationReadMe), 0644);
+    writeNewFile(resources + "/en.lproj/Greeting.txt", foundation::asBytes(kGreeting), 0644);
+    makeLink(resources + "/Latest.txt", "ReadMe.txt");
+    seal.addFile("Resources/ReadMe.txt", foundation::asBytes(kApplicationReadMe));
+    seal.addOptionalFile("Resources/en.lproj/Greeting.txt", foundation::asBytes(kGreeting));
+    seal.addLink("Resources/Latest.txt", "ReadMe.txt");
+}
+
+void writeTool(const std::string& programs, ResourceSeal& seal) {
+    const std::string name(kTool);
+    const Program program = makeProgram(std::string(kBundleIdentifier) + ".tool", {});
+    writeNewFile(programs + "/" + name, program.image, 0755);
+    seal.addNestedCode("Programs/" + name, program.codeHashes);
+}
+
+}  // namespace
+
 std::string writeSampleApplication(const std::string& directory) {
     const std::string name(kName);
-    const SealedComponents components{
-        .informationPropertyList = propertyListDocument({{"CFBundleExecutable", name},
-                                                         {"CFBundleIdentifier", kBundleIdentifier},
-                                                         {"CFBundleName", name},
-                                                         {"CFBundlePackageType", "APPL"},
-                                                         {"CFBundleVersion", "1"}}),
-        .resourceSeal = propertyListDocument({{"files", Dictionary{}}, {"files2", Dictionary{}}})};
     const std::string identifier(kBundleIdentifier);
-    const Data executable = makeUniversalImage({
-        {kCpuTypeX86_64, makeSignedImage(kCpuTypeX86_64, identifier, components)},
-        {kCpuTypeArm64, makeSignedImage(kCpuTypeArm64, identifier, components)},
-    });
-
     std::string path = directory + "/" + name + ".app";
     PendingDirectory pending(path, 0755);
     const std::string contents = pending.path() + "/Contents";
     makeDirectory(contents, 0755);
-    makeDirectory(contents + "/Programs", 0755);
-    makeDirectory(contents + "/_CodeSignature", 0755);
+    for (const char* const part : {"/Frameworks", "/Programs", "/_CodeSignature"})
+        makeDirectory(contents + part, 0755);
+
+    ResourceSeal seal;
+    writeFramework(contents + "/Frameworks", seal);
+    writeResources(contents + "/Resources", seal);
+    writeTool(contents + "/Programs", seal);
+    const SealedComponents components{.informationPropertyList = information(name, identifier, "APPL"),
+                                      .resourceSeal = seal.document()};
     writeNewFile(contents + "/Info.plist", components.informationPropertyList, 0644);
-    writeNewFile(contents + "/Programs/" + name, executable, 0755);
+    writeNewFile(contents + "/Programs/" + name, makeProgram(identifier, components).image, 0755);
     writeNewFile(contents + "/_CodeSignature/CodeResources", components.resourceSeal, 0644);
     pending.publish();
     return path;

@@ -1,10 +1,13 @@
-// A small signed application to try the service with.
+// A small signed application to try the service with. In Sample.app/Contents:
 //
-//   Sample.app/Contents/Info.plist
-//   Sample.app/Contents/Programs/Sample               the executable; any one directory in Contents would do
-//   Sample.app/Contents/_CodeSignature/CodeResources  the seal of its resources, of which there are none
+//   Info.plist
+//   Programs/Sample                 the executable; any one directory in Contents would do
+//   Programs/sample-tool            a nested program
+//   Frameworks/Greeting.framework   a nested framework of one version, with links, a seal and resources of
+//   its own Resources/ReadMe.txt Resources/Latest.txt            a link to it Resources/en.lproj/Greeting.txt
+//   may be missing _CodeSignature/CodeResources    the seal of all that (resource_seal.h)
 //
-// The executable is a universal image of two slices, each signed ad hoc (ad_hoc_signature.h).
+// The executables are universal images of two slices, each signed ad hoc (ad_hoc_signature.h).
 #pragma once
 
 #include <cstdint>
@@ -21,8 +24,8 @@ inline constexpr std::uint32_t kCpuTypeX86_64 = 0x01000007;
 
 /// The property list and the resource seal that a code directory covers.
 struct SealedComponents {
-    foundation::Data informationPropertyList;
-    foundation::Data resourceSeal;
+    foundation::Data informationPropertyList{};  // empty: it covers none
+    foundation::Data resourceSeal{};
 };
 
 /// One signed slice: a complete thin image for `cpuType`.

@@ -11,6 +11,7 @@
 #include "lumora-local/certificate_maker.h"
 #include "lumora-local/deflate.h"
 #include "lumora-local/file_writing.h"
+#include "lumora-local/sha256.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -55,13 +56,6 @@ const std::vector<ArchivedFile>& files() {
     static const std::vector<ArchivedFile> all{{"PackageInfo", kPackageInfo, true},
                                                {"ReadMe.txt", kReadMe, false}};
     return all;
-}
-
-Data sha1(ByteView bytes) {
-    Data digest(kChecksumSize);
-    require(EVP_Digest(bytes.data(), bytes.size(), octets(digest), nullptr, EVP_sha1(), nullptr) == 1,
-            "compute a digest");
-    return digest;
 }
 
 class Signer {

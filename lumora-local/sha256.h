@@ -1,4 +1,4 @@
-// SHA-256 (FIPS 180-4).
+// SHA-256 and SHA-1 (FIPS 180-4).
 #pragma once
 
 #include "foundation/bytes.h"
@@ -7,5 +7,8 @@ namespace pinwell::lumora {
 
 /// 32 bytes. Throws Failure when the cryptographic library fails.
 foundation::Data sha256(foundation::ByteView bytes);
+
+/// 20 bytes. Throws as sha256().
+foundation::Data sha1(foundation::ByteView bytes);
 
 }  // namespace pinwell::lumora

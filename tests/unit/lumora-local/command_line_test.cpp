@@ -171,7 +171,7 @@ TEST_F(CommandLine, TakesANewcomerFromNothingToARevokedTicket) {
     const Outcome issued = runProgram({"issue", service_, application});
     ASSERT_EQ(issued.exitStatus, 0) << issued.err;
     EXPECT_TRUE(issued.out.starts_with("valid\t2/2/")) << issued.out;
-    EXPECT_TRUE(issued.out.ends_with("\t2\tSample.app\n")) << issued.out;  // both slices
+    EXPECT_TRUE(issued.out.ends_with("\t6\tSample.app\n")) << issued.out;  // two slices, thrice
 
     const Outcome revoked = runProgram({"revoke", service_, application});
     ASSERT_EQ(revoked.exitStatus, 0) << revoked.err;
