@@ -11,6 +11,9 @@ find_package(ZLIB REQUIRED)
 pkg_check_modules(RE2 REQUIRED IMPORTED_TARGET re2)
 pkg_check_modules(SECCOMP REQUIRED IMPORTED_TARGET libseccomp>=2.5)
 
+# The companions alone.
+find_path(TOMLPLUSPLUS_INCLUDE_DIR toml++/toml.h REQUIRED)  # a header
+
 # The local record service alone.
 find_package(SQLiteCpp REQUIRED)
 find_package(SQLite3 REQUIRED)

@@ -56,8 +56,13 @@ VerifiedCode verifySeparately(const codesign::ByteSource& executable, const Bund
     return {.isSigned = true, .identities = {identityOf(*parts, place)}};
 }
 
-std::string joinedPlace(const std::string& a, const std::string& b) {
-    return a.empty() || b.empty() ? a + b : a + "/" + b;
+/// Whether a directory without a main executable was a signed bundle.
+bool hasSignatureFiles(const std::string& path) {
+    const DirectoryRef bundle = OpenDirectory::atPath(path);
+    if (bundle->kindOf(kSignatureDirectory)) return true;
+    if (bundle->kindOf("Contents") != EntryKind::directory) return false;
+    const DirectoryRef contents = bundle->directory("Contents");
+    return contents->kindOf(kSignatureDirectory) || contents->kindOf(kTicketFile);
 }
 
 }  // namespace
@@ -65,8 +70,8 @@ std::string joinedPlace(const std::string& a, const std::string& b) {
 VerifiedCode verifyBundleAt(const std::string& path, const std::string& place, WalkState& state,
                             Section& section) {
     const BundleLayout layout = layoutOfBundle(path);
-    const std::string rootPlace = joinedPlace(place, layout.rootPath);
-    const std::string executablePlace = joinedPlace(rootPlace, layout.executable);
+    const std::string rootPlace = joined(place, layout.rootPath);
+    const std::string executablePlace = joined(rootPlace, layout.executable);
     section.place = place;
 
     const std::optional<Data> list = componentAt(layout.root, layout.propertyList);
@@ -79,8 +84,9 @@ VerifiedCode verifyBundleAt(const std::string& path, const std::string& place, W
         isImage ? verifyExecutable(*executable, outside, executablePlace, state.workers, section)
                 : verifySeparately(*executable, layout, outside, executablePlace, state.workers, section);
 
-    const std::string sealPlace = joinedPlace(rootPlace, kSignatureDirectory + "/" + kSealFile);
+    const std::string sealPlace = joined(rootPlace, kSignatureDirectory + "/" + kSealFile);
     if (!code.isSigned && !document) return code;
+    if (!code.isSigned) section.fail(kSignature, executablePlace, "a signature", "none");
     code.isSigned = true;
     if (!document) {
         section.fail(kSeal, sealPlace, "the seal of the bundle's resources", "none");
@@ -103,7 +109,13 @@ VerifiedCode verifyBundleAt(const std::string& path, const std::string& place, W
 
 VerifiedCode verifyBundle(const std::string& path, Workers& workers, Section& section) {
     WalkState state{.workers = workers, .entries = 0, .depth = 0};
-    return verifyBundleAt(path, {}, state, section);
+    try {
+        return verifyBundleAt(path, {}, state, section);
+    } catch (const CodeError& error) {
+        if (error.status() != codesign::kStaticCodeNotFound || !hasSignatureFiles(path)) throw;
+        section.fail(kBundleStructure, "Contents", "one main executable", error.what());
+        return {.isSigned = true, .identities = {}};
+    }
 }
 
 }  // namespace pinwell::verify

@@ -36,4 +36,9 @@ inline const std::string kSignatureDirectory = "_CodeSignature";
 inline const std::string kSealFile = "CodeResources";
 inline const std::string kTicketFile = "CodeResources";
 
+/// Two paths with a slash between, unless one is empty.
+inline std::string joined(const std::string& a, const std::string& b) {
+    return a.empty() || b.empty() ? a + b : a + "/" + b;
+}
+
 }  // namespace pinwell::verify

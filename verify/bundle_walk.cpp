@@ -40,10 +40,6 @@ const char* kindName(EntryKind kind) {
     return "something special";
 }
 
-std::string joined(const std::string& a, const std::string& b) {
-    return a.empty() || b.empty() ? a + b : a + "/" + b;
-}
-
 /// A depth for as long as it is walked.
 class Descent {
   public:

@@ -1,5 +1,7 @@
 #include "verify/disk_image.h"
 
+#include <algorithm>
+
 #include "codesign/code_error.h"
 #include "codesign/disk_image_trailer.h"
 #include "codesign/superblob.h"
@@ -44,11 +46,26 @@ void checkSigned(const ByteSource& source, const DiskImageTrailer& trailer, cons
     checkPageHashes(source, code, parts, kPlace, workers, section);
 }
 
+/// Whether a file without a trailer was an image: a trailer that is cut, moved, or damaged in its first
+/// bytes.
+bool wasDiskImage(const ByteSource& source) {
+    constexpr std::uint64_t kTailSize = 8192;
+    constexpr std::uint32_t kVersion = 4;
+    const auto length = static_cast<std::size_t>(std::min(kTailSize, source.size()));
+    const Data tail = source.read(source.size() - length, length);
+    const ByteView magic = foundation::asBytes("koly");
+    if (std::search(tail.begin(), tail.end(), magic.begin(), magic.end()) != tail.end()) return true;
+    if (tail.size() < codesign::kTrailerSize) return false;
+    foundation::ByteReader reader(ByteView(tail).last(codesign::kTrailerSize));
+    reader.skip(4, "magic");
+    return reader.be32("version") == kVersion && reader.be32("header size") == codesign::kTrailerSize;
+}
+
 VerifiedCode verified(const ByteSource& source, Workers& workers, Section& section) {
     const std::optional<DiskImageTrailer> trailer = DiskImageTrailer::read(source);
     if (!trailer) {
-        section.fail(kTrailer, "end of the file", "a disk image's trailer", "none");
-        return {};
+        section.fail(kTrailer, "end of the file", "a disk image's trailer", "none that can be read");
+        return {.isSigned = wasDiskImage(source), .identities = {}};
     }
     const std::optional<FileRange> area = signatureArea(*trailer, section);
     if (!area) return {};

@@ -20,9 +20,8 @@ struct CodeIdentity {
     std::string identifier;
     std::optional<std::string> team;
     bool hasSecureTimestamp = false;
-    Data signerCertificate;  // SHA-256 of the signer's certificate; empty without one
-    bool isNested = false;   // a seal names it
-    bool isSealed = false;   // it is what that seal names
+    bool isNested = false;  // a seal names it
+    bool isSealed = false;  // it is what that seal names
 };
 
 /// What a piece of code turned out to be.

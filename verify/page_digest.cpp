@@ -2,6 +2,7 @@
 
 #include <openssl/evp.h>
 
+#include <algorithm>
 #include <map>
 #include <new>
 
@@ -115,6 +116,20 @@ PageDigest& threadDigest(Algorithm algorithm) {
 std::span<std::byte> threadBuffer() {
     thread_local const auto buffer = std::make_unique_for_overwrite<std::byte[]>(kBufferSize);
     return {buffer.get(), kBufferSize};
+}
+
+ByteView digestOf(Algorithm algorithm, const codesign::ByteSource& source, const codesign::FileRange& range) {
+    PageDigest& digest = threadDigest(algorithm);
+    digest.begin();
+    for (std::uint64_t done = 0; done < range.length;) {
+        const auto length =
+            static_cast<std::size_t>(std::min<std::uint64_t>(kBufferSize, range.length - done));
+        const std::span<std::byte> buffer = threadBuffer().first(length);
+        source.read(range.offset + done, buffer);
+        digest.update(buffer);
+        done += length;
+    }
+    return digest.finish();
 }
 
 }  // namespace pinwell::verify

@@ -6,7 +6,9 @@
 #include <memory>
 #include <string_view>
 
+#include "codesign/byte_source.h"
 #include "codesign/digest.h"
+#include "codesign/executable_image.h"
 
 namespace pinwell::verify {
 
@@ -47,5 +49,9 @@ PageDigest& threadDigest(Algorithm algorithm);
 /// A buffer of `kBufferSize` bytes, the thread's own. A function that uses it calls none that does.
 inline constexpr std::size_t kBufferSize = std::size_t{512} * 1024;
 std::span<std::byte> threadBuffer();
+
+/// Of a range of a source, with the thread's digest and buffer; good until that digest is used again. Throws
+/// codesign::CodeError.
+ByteView digestOf(Algorithm algorithm, const codesign::ByteSource& source, const codesign::FileRange& range);
 
 }  // namespace pinwell::verify

@@ -68,16 +68,9 @@ class PageCheck {
             const std::uint64_t size = pageSize(directory, code_.length);
             const std::uint64_t begin = page * size;
             const std::uint64_t end = begin + std::min(size, code_.length - begin);
-            PageDigest& digest = threadDigest(algorithmOf(directory.content.digestType()));
-            digest.begin();
-            for (std::uint64_t at = begin; at < end;) {
-                const auto length = static_cast<std::size_t>(std::min<std::uint64_t>(kBufferSize, end - at));
-                const std::span<std::byte> buffer = threadBuffer().first(length);
-                source_.read(code_.offset + at, buffer);
-                digest.update(buffer);
-                at += length;
-            }
-            compare(directory, static_cast<std::uint32_t>(page), begin, end - begin, digest.finish());
+            const ByteView found = digestOf(algorithmOf(directory.content.digestType()), source_,
+                                            {code_.offset + begin, end - begin});
+            compare(directory, static_cast<std::uint32_t>(page), begin, end - begin, found);
         });
     }
 

@@ -47,17 +47,8 @@ void SealedFiles::hashOne(const Job& job) {
     const bool isSha256 = job.entry->digest.size() == kSha256Length;
     try {
         const auto file = job.directory->file(job.name);
-        PageDigest& digest = threadDigest(isSha256 ? Algorithm::sha256 : Algorithm::sha1);
-        digest.begin();
-        for (std::uint64_t at = 0; at < file->size();) {
-            const auto length =
-                static_cast<std::size_t>(std::min<std::uint64_t>(kBufferSize, file->size() - at));
-            const std::span<std::byte> buffer = threadBuffer().first(length);
-            file->read(at, buffer);
-            digest.update(buffer);
-            at += length;
-        }
-        const ByteView found = digest.finish();
+        const ByteView found =
+            digestOf(isSha256 ? Algorithm::sha256 : Algorithm::sha1, *file, {0, file->size()});
         const bool isSame =
             std::equal(found.begin(), found.end(), job.entry->digest.begin(), job.entry->digest.end());
         if (!isSame) report(Outcome::failed, job, foundation::toHex(found));
