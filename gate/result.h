@@ -36,6 +36,7 @@ struct Result {
     std::string recordName;
     std::uint32_t digestType = 0;
     foundation::Data codeHash;
+    foundation::Data fileDigest;  // SHA-256 of a file's bytes, if an attestation is wanted
 };
 
 }  // namespace pinwell::gate

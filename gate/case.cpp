@@ -1,0 +1,299 @@
+#include "gate/case.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "codesign/byte_source.h"
+#include "codesign/code_error.h"
+#include "codesign/executable_image.h"
+#include "foundation/format.h"
+#include "gate/policy.h"
+#include "src/PWHashedFile/PWHashedBundle.h"
+#include "src/PWHashedFile/PWHashedDiskImage.h"
+#include "src/PWHashedFile/PWHashedFlatPackage.h"
+#include "src/ticket_record.h"
+#include "verify/check_names.h"
+#include "verify/page_digest.h"
+
+namespace pinwell::gate {
+
+using foundation::format;
+using foundation::URL;
+using verify::CodeIdentity;
+using verify::Kind;
+using verify::Outcome;
+
+namespace {
+
+const std::string kStapledPlace = "stapled ticket";
+const std::string kServicePlace = "ticket of the record service";
+
+std::string reasonOf(const foundation::Error& error) {
+    const std::string& reason = error.localizedFailureReason();
+    return reason.empty() ? error.localizedDescription() : reason;
+}
+
+const char* nameOf(Kind kind) {
+    switch (kind) {
+        case Kind::bundle:
+            return "bundle";
+        case Kind::executable:
+            return "executable";
+        case Kind::diskImage:
+            return "diskImage";
+        case Kind::package:
+            break;
+    }
+    return "package";
+}
+
+bool isExecutableImage(const std::string& path) {
+    try {
+        return codesign::isExecutableImage(codesign::FileSource(path));
+    } catch (const codesign::CodeError&) {
+        return false;
+    }
+}
+
+/// The kind that the tool sees; `nullopt` for what it does not take, or takes for want of a better one.
+std::optional<Kind> kindOf(const PWHashedFile& file, bool isFile, const std::string& path) {
+    if (dynamic_cast<const PWHashedDiskImage*>(&file) != nullptr && isFile) return Kind::diskImage;
+    if (dynamic_cast<const PWHashedFlatPackage*>(&file) != nullptr && isFile) return Kind::package;
+    if (dynamic_cast<const PWHashedBundle*>(&file) == nullptr) return std::nullopt;
+    if (!isFile) return Kind::bundle;
+    return isExecutableImage(path) ? std::optional(Kind::executable) : std::nullopt;
+}
+
+}  // namespace
+
+Case::Case(std::string path, const Judgement& judgement) : judgement_(judgement) {
+    result_.path = std::move(path);
+    result_.verdict = Verdict::good;
+    result_.conclusion = judgement.options.isShallow ? "Its ticket is good."
+                                                     : "It is what was signed, and its ticket is good.";
+}
+
+Case::~Case() = default;
+Case::Case(Case&&) noexcept = default;
+
+void Case::atLeast(Verdict verdict, std::string conclusion) {
+    if (verdict <= result_.verdict) return;
+    result_.verdict = verdict;
+    result_.conclusion = std::move(conclusion);
+}
+
+void Case::unreadable(const std::string& why) {
+    atLeast(Verdict::unreadable, why);
+    result_.checks.cannotRead(verify::kArtefact, {}, why);
+}
+
+void Case::examine() {
+    if (!open()) return;
+    isStapledAcceptable_ = judgeStapled();
+    const bool knowsNothing = !codeHash_ && !stapled_;
+    // Without a hash and a ticket, all that is left to ask is whether there is a signature at all.
+    if (!judgement_.options.isShallow || knowsNothing) verifyBytes();
+    if (judgement_.tickets != nullptr && codeHash_) lookInDirectory();
+    if (!judgement_.options.attestation.empty() && kind_ != Kind::bundle) digestFile();
+    file_.reset();
+}
+
+bool Case::open() {
+    // A URL is made absolute with the working directory; a path is shown as it was given.
+    const URL url = URL::fileURLWithPath(result_.path);
+    if (const auto properties = judgement_.platform.files.resourceProperties(url); !properties) {
+        unreadable("The path cannot be read: " + reasonOf(properties.error()) + ".");
+        return false;
+    }
+    const auto regular = judgement_.platform.files.isRegularFile(url);
+    const bool isFile = regular && *regular;
+    if (isFile) {
+        if (const auto opened = judgement_.platform.files.openForReading(url); !opened) {
+            unreadable("The file cannot be read: " + reasonOf(opened.error()) + ".");
+            return false;
+        }
+    }
+    file_ = PWHashedFile::initWithFileURL(url, judgement_.platform);
+    const auto kind = file_ ? kindOf(*file_, isFile, url.path()) : std::nullopt;
+    if (!kind) {
+        unreadable("This is of no kind that carries a ticket.");
+        return false;
+    }
+    kind_ = *kind;
+    absolutePath_ = url.path();
+    result_.kind = nameOf(kind_);
+    return true;
+}
+
+bool Case::judgeStapled() {
+    // The tool goes no further with such a file, which has no hash and no ticket to it.
+    if (file_->appropriateExitCode() != kExitOK) return false;
+    codeHash_ = file_->cdHash();
+    if (codeHash_) {
+        result_.codeHash = *codeHash_;
+        result_.digestType = file_->digestAlgorithm();
+        result_.recordName = recordNameForHash(result_.digestType, *codeHash_);
+    }
+    const std::optional<foundation::Data> bytes = file_->ticketData();
+    if (!bytes) return false;
+    result_.checks.pass(verify::kTicketStapled, kStapledPlace, "a ticket");
+    stapled_.emplace(*bytes, judgement_.platform.trust);
+    const bool isAcceptable = checkTicket(*stapled_, codeHash_, kStapledPlace, result_.checks);
+    if (stapled_->isGenuine() && stapled_->isRevoked())
+        atLeast(Verdict::revoked, "Its ticket revokes it: it must not run.");
+    else if (!isAcceptable)
+        atLeast(Verdict::refused, "Its ticket is not acceptable.");
+    return isAcceptable;
+}
+
+void Case::verifyBytes() {
+    verify::Report report = verify::verifyArtefact({kind_, absolutePath_}, judgement_.workers);
+    code_ = std::move(report.code);
+    hasCode_ = true;
+    requireOneArtefact();
+    const bool isSigned = code_.isSigned || codeHash_ || stapled_;
+    if (!isSigned) {
+        atLeast(Verdict::unreadable, "It has no signature.");
+        // Without one there is nothing that the bytes could differ from.
+        result_.checks.cannotRead(verify::kSignature, {}, "there is no signature");
+        return;
+    }
+    if (judgement_.options.isShallow) return;
+    result_.checks.sections.push_back(std::move(report.root));
+    switch (verify::worstOutcome(result_.checks.sections.back())) {
+        case Outcome::failed:
+            atLeast(Verdict::altered, "It is not what was signed.");
+            break;
+        case Outcome::unreadable:
+            atLeast(Verdict::unreadable, "Not all of it can be read.");
+            break;
+        case Outcome::passed:
+        case Outcome::skipped:
+        case Outcome::noted:
+            break;
+    }
+}
+
+// The tool has found the hash, and these checks the code: of two openings of one path.
+void Case::requireOneArtefact() {
+    if (!codeHash_ || code_.identities.empty()) return;
+    const bool isThere =
+        std::any_of(code_.identities.begin(), code_.identities.end(), [&](const CodeIdentity& identity) {
+            return !identity.isNested && identity.codeHashes.front() == *codeHash_;
+        });
+    if (isThere) return;
+    result_.checks.fail(verify::kArtefact, {}, foundation::toHex(*codeHash_),
+                        foundation::toHex(code_.identities.front().codeHashes.front()));
+    atLeast(Verdict::altered, "It changed while it was read.");
+}
+
+// The same file as was verified, as long as nobody changes it meanwhile.
+void Case::digestFile() {
+    try {
+        const codesign::FileSource file(absolutePath_);
+        result_.fileDigest =
+            foundation::toData(verify::digestOf(verify::Algorithm::sha256, file, {0, file.size()}));
+    } catch (const codesign::CodeError& error) {
+        unreadable(std::string("The file cannot be read: ") + error.what() + ".");
+    }
+}
+
+bool Case::asksService() const {
+    return judgement_.options.tickets == Options::Tickets::online && isStapledAcceptable_;
+}
+
+void Case::lookInDirectory() {
+    const TicketDirectory::Found found = judgement_.tickets->find(result_.recordName);
+    if (!found.problem.empty()) {
+        result_.checks.fail(verify::kTicketCurrent, found.file, "a ticket", found.problem);
+        atLeast(Verdict::refused, "The ticket that was fetched for it cannot be read.");
+    } else if (!found.ticket) {
+        result_.checks.note(verify::kTicketCurrent, found.file, "a ticket",
+                            "none was fetched for it, so the stapled one decides");
+    } else {
+        takeCurrent(*found.ticket, found.file);
+    }
+}
+
+void Case::takeFetched(const retrieval::FetchedTicket& fetched) {
+    using retrieval::Cause;
+    if (!fetched.ticket.empty()) return takeCurrent(fetched.ticket, kServicePlace);
+    std::string why(retrieval::nameOf(fetched.cause));
+    if (!fetched.messages.empty()) why += ": " + fetched.messages.back();
+    switch (fetched.cause) {
+        case Cause::notIssued:
+        case Cause::notAcceptable:
+            result_.checks.fail(verify::kTicketCurrent, kServicePlace, "a ticket", why);
+            atLeast(Verdict::refused, fetched.cause == Cause::notIssued
+                                          ? "The record service has no ticket for it."
+                                          : "The record service's ticket is not acceptable.");
+            break;
+        default:
+            result_.checks.cannotRead(verify::kTicketCurrent, kServicePlace, why);
+            atLeast(Verdict::unreachable, fetched.cause == Cause::untrusted
+                                              ? "The server that answered is not the record service."
+                                              : "The record service cannot be reached.");
+    }
+}
+
+void Case::takeCurrent(foundation::ByteView bytes, const std::string& place) {
+    current_.emplace(bytes, judgement_.platform.trust);
+    const bool isAcceptable = checkTicket(*current_, codeHash_, place, result_.checks);
+    if (isAcceptable) {
+        result_.checks.pass(verify::kTicketCurrent, place, "a ticket that accepts the artefact");
+    } else if (current_->isGenuine() && current_->isRevoked()) {
+        atLeast(Verdict::revoked, "Its ticket has been revoked: it must not run.");
+    } else {
+        atLeast(Verdict::refused, "The ticket that was fetched for it is not acceptable.");
+    }
+}
+
+// Whether somebody vouches for each piece of code: the ticket, or the seal of code that the ticket lists.
+void Case::checkListing() {
+    if (!isStapledAcceptable_ || judgement_.options.isShallow) return;
+    for (const CodeIdentity& identity : code_.identities) {
+        const auto isListed = [&](const foundation::Data& hash) {
+            return stapled_->lists(hash) || (current_ && current_->lists(hash));
+        };
+        const std::string hash = foundation::toHex(identity.codeHashes.front());
+        if (std::any_of(identity.codeHashes.begin(), identity.codeHashes.end(), isListed)) {
+            result_.checks.pass(verify::kCodeListed, identity.place, hash);
+        } else if (identity.isSealed) {
+            result_.checks.note(verify::kCodeListed, identity.place, hash,
+                                "the ticket does not list it; the seal around it names it");
+        } else {
+            result_.checks.fail(verify::kCodeListed, identity.place, hash, "the ticket does not list it");
+            atLeast(Verdict::altered, "There is code in it that nobody vouches for.");
+        }
+    }
+}
+
+void Case::checkPolicy() {
+    const Policy& policy = judgement_.options.policy;
+    const JudgedTicket* const deciding = current_ && current_->isGenuine()   ? &*current_
+                                         : stapled_ && stapled_->isGenuine() ? &*stapled_
+                                                                             : nullptr;
+    if (!checkAgainst(policy, deciding, code_, judgement_.now, result_.checks))
+        atLeast(Verdict::refused, "The policy does not admit it.");
+}
+
+Result Case::conclude() && {
+    if (result_.kind.empty() || (!codeHash_ && !stapled_ && hasCode_ && !code_.isSigned))
+        return std::move(result_);
+    if (!stapled_) {
+        result_.checks.checks.insert(
+            result_.checks.checks.begin(),
+            {std::string(verify::kTicketStapled), kStapledPlace, Outcome::failed, "a ticket",
+             kind_ == Kind::executable ? "none: an executable outside a bundle has no place for one"
+                                       : "none"});
+        atLeast(Verdict::noTicket, "No ticket is stapled to it.");
+    }
+    if (!isStapledAcceptable_ && judgement_.options.tickets == Options::Tickets::online)
+        result_.checks.skip(verify::kTicketCurrent, kServicePlace,
+                            "not asked for, since the stapled ticket is not acceptable");
+    checkListing();
+    checkPolicy();
+    return std::move(result_);
+}
+
+}  // namespace pinwell::gate

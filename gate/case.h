@@ -1,0 +1,81 @@
+// One artefact on its way to a verdict: its ticket, its bytes, the ticket of today, and the policy.
+//
+//   Case one(path, judgement);
+//   one.examine();                         // reads the artefact; on any thread
+//   if (one.asksService()) one.takeFetched(...);
+//   Result result = std::move(one).conclude();
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "gate/options.h"
+#include "gate/result.h"
+#include "gate/ticket.h"
+#include "gate/ticket_directory.h"
+#include "retrieval/ticket_fetch.h"
+#include "src/PWHashedFile/PWHashedFile.h"
+#include "src/platform.h"
+#include "verify/verify.h"
+#include "verify/workers.h"
+
+namespace pinwell::gate {
+
+/// What all cases of a run share.
+struct Judgement {
+    const Platform& platform;
+    const Options& options;
+    verify::Workers& workers;
+    const TicketDirectory* tickets;  // null without --tickets
+    std::int64_t now;                // seconds since 1970-01-01 00:00:00 UTC
+};
+
+/// Used by one thread at a time. Never throws for what is wrong with the artefact; throws std::bad_alloc. The
+/// tool's message functions must be silent.
+class Case {
+  public:
+    Case(std::string path, const Judgement& judgement);
+    ~Case();
+    Case(Case&&) noexcept;
+    Case& operator=(Case&&) = delete;
+
+    /// Reads all that is on disk.
+    void examine();
+
+    /// Whether the service's answer matters: only where the stapled ticket is acceptable, as for the tool.
+    bool asksService() const;
+    const std::string& recordName() const noexcept { return result_.recordName; }
+
+    void takeFetched(const retrieval::FetchedTicket& fetched);
+
+    /// The verdict. Once, and last.
+    Result conclude() &&;
+
+  private:
+    bool open();
+    bool judgeStapled();
+    void verifyBytes();
+    void requireOneArtefact();
+    void digestFile();
+    void lookInDirectory();
+    void takeCurrent(foundation::ByteView bytes, const std::string& place);
+    void checkListing();
+    void checkPolicy();
+    void atLeast(Verdict verdict, std::string conclusion);
+    void unreadable(const std::string& why);
+
+    const Judgement& judgement_;
+    Result result_;
+    std::shared_ptr<PWHashedFile> file_;
+    verify::Kind kind_ = verify::Kind::bundle;
+    std::string absolutePath_;
+    std::optional<foundation::Data> codeHash_;
+    std::optional<JudgedTicket> stapled_;
+    std::optional<JudgedTicket> current_;  // of the service, or of the directory
+    bool isStapledAcceptable_ = false;
+    verify::VerifiedCode code_;
+    bool hasCode_ = false;  // the bytes were looked at
+};
+
+}  // namespace pinwell::gate

@@ -1,0 +1,13 @@
+// Texts in XML and HTML.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+namespace pinwell::gate {
+
+/// In UTF-8, without control characters, with the characters of markup as entities: good between tags and in
+/// quoted attributes.
+std::string markupText(std::string_view text);
+
+}  // namespace pinwell::gate

@@ -1,0 +1,165 @@
+#include "gate/policy.h"
+
+#include <algorithm>
+#include <charconv>
+#include <functional>
+#include <limits>
+
+#include "foundation/date.h"
+#include "foundation/format.h"
+#include "verify/check_names.h"
+
+namespace pinwell::gate {
+
+using foundation::format;
+using verify::CodeIdentity;
+
+namespace {
+
+constexpr std::int64_t kMaximumAge = std::int64_t{10'000} * 366 * 86'400;
+
+/// How far the clocks of signer and consumer may be apart.
+constexpr std::int64_t kClockTolerance = 86'400;
+
+std::int64_t secondsIn(char unit) {
+    switch (unit) {
+        case 's':
+            return 1;
+        case 'm':
+            return 60;
+        case 'h':
+            return 3600;
+        case 'd':
+            return 86'400;
+        case 'w':
+            return 7 * 86'400;
+        default:
+            return 0;
+    }
+}
+
+std::string listed(const std::vector<std::string>& texts) {
+    std::string all;
+    for (const std::string& text : texts) all += (all.empty() ? "" : " or ") + text;
+    return all;
+}
+
+std::string dateOf(std::int64_t seconds) {
+    constexpr std::int64_t kEndOfYear9999 = 253'402'300'799;
+    if (seconds < 0 || seconds > kEndOfYear9999) return format("%lld seconds after 1970", seconds);
+    return foundation::toString(foundation::Date{seconds});
+}
+
+bool checkAge(std::int64_t most, const JudgedTicket* ticket, std::int64_t now, verify::Section& section) {
+    const std::string wanted = format("a ticket that was signed at %@ or later", dateOf(now - most));
+    const char* const place = "ticket";
+    if (ticket == nullptr) {
+        section.fail(verify::kPolicyTicketAge, place, wanted, "no genuine ticket");
+        return false;
+    }
+    const std::uint64_t stated = ticket->signatureTime();
+    if (stated > static_cast<std::uint64_t>(std::numeric_limits<std::int64_t>::max())) {
+        section.fail(verify::kPolicyTicketAge, place, wanted, "a time that is none");
+        return false;
+    }
+    const auto time = static_cast<std::int64_t>(stated);
+    const bool isYoung = time >= now - most && time <= now + kClockTolerance;
+    section.add({std::string(verify::kPolicyTicketAge), place,
+                 isYoung ? verify::Outcome::passed : verify::Outcome::failed, wanted,
+                 "signed at " + dateOf(time)});
+    return isYoung;
+}
+
+/// Asks something of every slice of the artefact's own code.
+bool checkOwnCode(std::string_view name, const std::string& wanted, const verify::VerifiedCode& code,
+                  const std::function<std::optional<std::string>(const CodeIdentity&)>& fault,
+                  verify::Section& section) {
+    bool isSatisfied = true;
+    std::size_t own = 0;
+    for (const CodeIdentity& identity : code.identities) {
+        if (identity.isNested) continue;
+        ++own;
+        const std::optional<std::string> found = fault(identity);
+        if (found) section.fail(name, identity.place, wanted, *found);
+        isSatisfied = isSatisfied && !found;
+    }
+    if (own == 0) {
+        section.fail(name, {}, wanted, "no signature that says");
+        return false;
+    }
+    if (isSatisfied) section.pass(name, {}, wanted);
+    return isSatisfied;
+}
+
+}  // namespace
+
+std::optional<std::int64_t> ageFrom(std::string_view text) {
+    std::int64_t number = 0;
+    const char* const end = text.data() + text.size();
+    const auto result = std::from_chars(text.data(), end, number);
+    if (result.ec != std::errc{} || result.ptr + 1 != end || number < 0) return std::nullopt;
+    const std::int64_t unit = secondsIn(*result.ptr);
+    if (unit == 0 || number > kMaximumAge / unit) return std::nullopt;
+    return number * unit;
+}
+
+bool matchesGlob(std::string_view glob, std::string_view text) {
+    std::size_t at = 0;
+    std::size_t in = 0;
+    std::size_t star = std::string_view::npos;  // the last one, and what it has taken up to
+    std::size_t taken = 0;
+    while (at < text.size()) {
+        if (in < glob.size() && glob[in] == '*') {
+            star = in++;
+            taken = at;
+        } else if (in < glob.size() && (glob[in] == '?' || glob[in] == text[at])) {
+            ++in;
+            ++at;
+        } else if (star != std::string_view::npos) {
+            in = star + 1;
+            at = ++taken;
+        } else {
+            return false;
+        }
+    }
+    return glob.find_first_not_of('*', in) == std::string_view::npos;
+}
+
+bool checkAgainst(const Policy& policy, const JudgedTicket* deciding, const verify::VerifiedCode& code,
+                  std::int64_t now, verify::Section& section) {
+    bool isSatisfied = true;
+    if (policy.maximumTicketAge)
+        isSatisfied = checkAge(*policy.maximumTicketAge, deciding, now, section) && isSatisfied;
+    if (!policy.teams.empty()) {
+        const auto fault = [&](const CodeIdentity& identity) -> std::optional<std::string> {
+            if (!identity.team) return "no team";
+            const bool isOne =
+                std::find(policy.teams.begin(), policy.teams.end(), *identity.team) != policy.teams.end();
+            return isOne ? std::nullopt : identity.team;
+        };
+        isSatisfied =
+            checkOwnCode(verify::kPolicyTeam, listed(policy.teams), code, fault, section) && isSatisfied;
+    }
+    if (!policy.identifiers.empty()) {
+        const auto fault = [&](const CodeIdentity& identity) -> std::optional<std::string> {
+            const bool matches =
+                std::any_of(policy.identifiers.begin(), policy.identifiers.end(),
+                            [&](const std::string& glob) { return matchesGlob(glob, identity.identifier); });
+            if (matches) return std::nullopt;
+            return identity.identifier.empty() ? "no identifier" : identity.identifier;
+        };
+        isSatisfied =
+            checkOwnCode(verify::kPolicyIdentifier, listed(policy.identifiers), code, fault, section) &&
+            isSatisfied;
+    }
+    if (policy.requiresSecureTimestamp) {
+        const auto fault = [](const CodeIdentity& identity) -> std::optional<std::string> {
+            return identity.hasSecureTimestamp ? std::nullopt : std::optional<std::string>("none");
+        };
+        isSatisfied =
+            checkOwnCode(verify::kPolicyTimestamp, "a secure timestamp", code, fault, section) && isSatisfied;
+    }
+    return isSatisfied;
+}
+
+}  // namespace pinwell::gate

@@ -1,0 +1,105 @@
+#include "foundation/format.h"
+#include "gate/markup.h"
+#include "gate/render.h"
+
+namespace pinwell::gate {
+
+namespace {
+
+using verify::Check;
+using verify::Outcome;
+
+constexpr std::string_view kStyle = R"(
+:root { color-scheme: light dark; --good: #1a7f37; --bad: #b3261e; --mild: #8a6100; --line: #8884; }
+@media (prefers-color-scheme: dark) { :root { --good: #4ac26b; --bad: #ff8a80; --mild: #e3b341; } }
+body { font: 16px/1.5 system-ui, sans-serif; max-width: 72rem; margin: 2rem auto; padding: 0 1rem; }
+h1 { font-size: 1.5rem; margin-bottom: .25rem; }
+h2 { font-size: 1.1rem; margin: 0; overflow-wrap: anywhere; }
+section { border: 1px solid var(--line); border-left: .4rem solid var(--bad); border-radius: .4rem;
+  padding: .8rem 1rem; margin: 1rem 0; }
+section.good { border-left-color: var(--good); }
+section.unreachable, section.unreadable { border-left-color: var(--mild); }
+.verdict { font-weight: 600; }
+.good .verdict, .passed { color: var(--good); }
+.bad .verdict, .failed { color: var(--bad); }
+.unreachable .verdict, .unreadable, .noted { color: var(--mild); }
+table { border-collapse: collapse; width: 100%; margin-top: .6rem; font-size: .9rem; }
+th, td { text-align: left; vertical-align: top; padding: .3rem .6rem .3rem 0; border-top: 1px solid var(--line);
+  overflow-wrap: anywhere; }
+td.value { font-family: ui-monospace, monospace; font-size: .85em; }
+summary { cursor: pointer; margin-top: .6rem; }
+@media print { details > * { display: revert; } }
+)";
+
+/// The page loads nothing and runs nothing, whatever the names in it are.
+constexpr std::string_view kHead =
+    "<!DOCTYPE html>\n<html lang=\"en\">\n<head>\n<meta charset=\"utf-8\">\n"
+    "<meta name=\"viewport\" content=\"width=device-width, initial-scale=1\">\n"
+    "<meta http-equiv=\"Content-Security-Policy\" content=\"default-src 'none'; style-src "
+    "'unsafe-inline'\">\n"
+    "<title>pinwell-gate</title>\n<style>";
+
+bool isWorthShowing(const Check& check) {
+    return check.outcome != Outcome::passed && check.outcome != Outcome::skipped;
+}
+
+std::string tableOf(const std::vector<Check>& checks, bool worthShowing) {
+    std::string rows;
+    for (const Check& check : checks) {
+        if (isWorthShowing(check) != worthShowing) continue;
+        const std::string outcome(verify::outcomeName(check.outcome));
+        rows += "<tr><td class=\"" + outcome + "\">" + outcome + "</td><td>" + markupText(check.name) +
+                "</td><td>" + markupText(check.place) + "</td><td class=\"value\">" +
+                markupText(check.expected) + "</td><td class=\"value\">" + markupText(check.found) +
+                "</td></tr>\n";
+    }
+    if (rows.empty()) return {};
+    return "<table>\n<thead><tr><th scope=\"col\">Outcome</th><th scope=\"col\">Check</th><th "
+           "scope=\"col\">Place</th><th scope=\"col\">Expected</th><th "
+           "scope=\"col\">Found</th></tr></thead>\n<tbody>\n" +
+           rows + "</tbody>\n</table>\n";
+}
+
+std::string classOf(Verdict verdict) {
+    switch (verdict) {
+        case Verdict::good:
+        case Verdict::unreachable:
+        case Verdict::unreadable:
+            return std::string(verdictName(verdict));
+        case Verdict::noTicket:
+        case Verdict::refused:
+        case Verdict::altered:
+        case Verdict::revoked:
+            break;
+    }
+    return "bad";
+}
+
+std::string sectionOf(const Result& result) {
+    const std::vector<Check> checks = verify::flattened(result.checks);
+    std::string html = "<section class=\"" + classOf(result.verdict) + "\">\n<h2>" + markupText(result.path) +
+                       "</h2>\n<div><span class=\"verdict\">" + markupText(verdictName(result.verdict)) +
+                       "</span>: " + markupText(result.conclusion) + "</div>\n" + tableOf(checks, true);
+    const std::string rest = tableOf(checks, false);
+    if (!rest.empty())
+        html += "<details><summary>All that was as it should be</summary>\n" + rest + "</details>\n";
+    return html + "</section>\n";
+}
+
+}  // namespace
+
+std::string renderHtml(const std::vector<Result>& results) {
+    std::size_t good = 0;
+    std::string sections;
+    for (const Result& result : results) {
+        good += result.verdict == Verdict::good ? 1 : 0;
+        sections += sectionOf(result);
+    }
+    const std::string summary = good == results.size()
+                                    ? foundation::format("All %zu may be let in.", good)
+                                    : foundation::format("%zu of %zu may be let in.", good, results.size());
+    return std::string(kHead) + std::string(kStyle) + "</style>\n</head>\n<body>\n<h1>" + summary +
+           "</h1>\n" + sections + "</body>\n</html>\n";
+}
+
+}  // namespace pinwell::gate

@@ -1,0 +1,67 @@
+#include "gate/run.h"
+
+#include <algorithm>
+#include <chrono>
+#include <memory>
+#include <utility>
+
+#include "gate/case.h"
+
+namespace pinwell::gate {
+
+namespace {
+
+/// Somebody waits at the gate: one more try after half a second, and another after a second.
+retrieval::FetchOptions fetchOptions() {
+    retrieval::FetchOptions options;
+    options.retry.retries = 2;
+    options.retry.firstDelay = std::chrono::milliseconds(500);
+    return options;
+}
+
+void askService(std::vector<Case>& cases, const Platform& platform) {
+    std::vector<std::string> names;
+    std::vector<Case*> asking;
+    for (Case& one : cases) {
+        if (!one.asksService()) continue;
+        names.push_back(one.recordName());
+        asking.push_back(&one);
+    }
+    if (names.empty()) return;
+    retrieval::Cancellation cancellation;
+    retrieval::fetchTickets(names, fetchOptions(), platform, cancellation,
+                            [&](std::size_t index, const retrieval::FetchedTicket& fetched) {
+                                asking[index]->takeFetched(fetched);
+                            });
+}
+
+}  // namespace
+
+std::vector<Result> judgeAll(const std::vector<std::string>& paths, const Options& options,
+                             const TicketDirectory* tickets, const Platform& platform) {
+    verify::Workers workers;
+    const auto now = std::chrono::system_clock::now().time_since_epoch();
+    const Judgement judgement{.platform = platform,
+                              .options = options,
+                              .workers = workers,
+                              .tickets = tickets,
+                              .now = std::chrono::duration_cast<std::chrono::seconds>(now).count()};
+    std::vector<Case> cases;
+    cases.reserve(paths.size());
+    for (const std::string& path : paths) cases.emplace_back(path, judgement);
+    workers.forEach(cases.size(), [&](std::size_t i) { cases[i].examine(); });
+    askService(cases, platform);
+    std::vector<Result> results;
+    results.reserve(cases.size());
+    for (Case& one : cases) results.push_back(std::move(one).conclude());
+    return results;
+}
+
+int exitStatusOf(const std::vector<Result>& results) {
+    const auto worst = std::max_element(results.begin(), results.end(), [](const Result& a, const Result& b) {
+        return a.verdict < b.verdict;
+    });
+    return worst == results.end() ? 0 : exitStatusOf(worst->verdict);
+}
+
+}  // namespace pinwell::gate

@@ -1,0 +1,20 @@
+// A run over many paths: reading in parallel, one conversation with the record service, one verdict a path.
+#pragma once
+
+#include <vector>
+
+#include "gate/options.h"
+#include "gate/result.h"
+#include "gate/ticket_directory.h"
+#include "src/platform.h"
+
+namespace pinwell::gate {
+
+/// One result a path, in their order. `tickets` is null without --tickets.
+std::vector<Result> judgeAll(const std::vector<std::string>& paths, const Options& options,
+                             const TicketDirectory* tickets, const Platform& platform);
+
+/// The exit status of a run: that of the gravest verdict.
+int exitStatusOf(const std::vector<Result>& results);
+
+}  // namespace pinwell::gate
