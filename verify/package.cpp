@@ -1,12 +1,368 @@
 #include "verify/package.h"
 
+#include <algorithm>
+#include <mutex>
+#include <utility>
+
+#include "codesign/cms_signature.h"
+#include "codesign/code_error.h"
+#include "foundation/byte_reader.h"
+#include "foundation/format.h"
+#include "src/PWHashedFile/package_trailer_walk.h"
+#include "verify/archive_table.h"
 #include "verify/check_names.h"
+#include "xar/header.h"
+#include "xar/inflater.h"
+#include "xar/table_of_contents.h"
 
 namespace pinwell::verify {
 
-VerifiedCode verifyPackage(const codesign::ByteSource&, Workers&, Section& section) {
-    section.cannotRead(kArchive, "archive", "deep verification of packages is not built in yet");
-    return {.isSigned = true, .identities = {}};
+using codesign::ByteSource;
+using codesign::CodeError;
+using codesign::FileRange;
+using codesign::refuse;
+using foundation::format;
+
+namespace {
+
+constexpr std::size_t kTablePieceSize = std::size_t{64} * 1024;
+constexpr std::string_view kCmsStyle = "CMS";
+
+/// Longest signature that is held whole; one takes some 10 KiB.
+constexpr std::uint64_t kMaximumSignature = std::uint64_t{16} * 1024 * 1024;
+
+/// The first bytes of a source, as the walk along the trailers reads them.
+class StartOfSource final : public files::FileReader {
+  public:
+    StartOfSource(const ByteSource& source, std::uint64_t end) : source_(source), end_(end) {}
+
+    std::uint64_t seekToEnd() override { return position_ = end_; }
+    std::uint64_t seek(std::uint64_t position) override { return position_ = position; }
+    std::uint64_t position() override { return position_; }
+    Data read(std::uint64_t length) override {
+        const std::uint64_t rest = end_ - std::min(position_, end_);
+        const auto count = static_cast<std::size_t>(std::min(length, rest));
+        try {
+            Data bytes = source_.read(position_, count);
+            position_ += count;
+            return bytes;
+        } catch (const CodeError& error) {
+            throw files::FileHandleError(error.what());
+        }
+    }
+
+  private:
+    const ByteSource& source_;
+    const std::uint64_t end_;
+    std::uint64_t position_ = 0;
+};
+
+/// Where the archive ends and the trailers behind it begin.
+std::uint64_t endOfArchive(const ByteSource& source, Section& section) {
+    std::uint64_t end = source.size();
+    for (;;) {
+        std::uint64_t first = end;
+        StartOfSource reader(source, end);
+        const package_trailers walked =
+            walkPackageTrailers(reader, {}, [&](std::uint64_t recordOffset, const trailer_header& record) {
+                first = recordOffset - std::min<std::uint64_t>(record.length(), recordOffset);
+                if (record.type() != kTerminatorTrailerType && record.type() != kTicketTrailerType)
+                    section.note(kTrailers, format("trailer (from byte %llu on)", first), "a ticket",
+                                 format("a trailer of type %u", record.type()));
+            });
+        if (walked.fault || first == end) return end;
+        end = first;
+        if (walked.hasTerminator) return end;
+    }
+}
+
+struct Archive {
+    std::uint64_t heapStart = 0;
+    ArchiveTable table;
+    xar::DigestAlgorithm algorithm = xar::DigestAlgorithm::none;
+    Data computed;  // checksum of the table
+    Data stored;    // the one in the heap, which is signed
+};
+
+Archive readArchive(const ByteSource& source, std::uint64_t end) {
+    const auto start =
+        source.read(0, static_cast<std::size_t>(std::min<std::uint64_t>(xar::kLongestHeaderRead, end)));
+    const std::optional<xar::Header> header = xar::parseHeader(start);
+    if (!header) refuse("the archive's header is damaged");
+    if (header->size > end || header->compressedLength > end - header->size ||
+        header->compressedLength > xar::kMaximumTableOfContents)
+        refuse("the table of contents lies outside the archive");
+
+    ArchiveTableReader reader;
+    std::uint64_t length = 0;
+    xar::Inflater inflater(xar::kMaximumTableOfContents, [&](ByteView bytes) {
+        length += bytes.size();
+        reader.feed(bytes);
+        return true;
+    });
+    xar::Digest digest(header->algorithm);
+    Archive archive;
+    archive.heapStart = header->size + header->compressedLength;
+    for (std::uint64_t at = header->size; at < archive.heapStart;) {
+        const Data piece = source.read(
+            at, static_cast<std::size_t>(std::min<std::uint64_t>(kTablePieceSize, archive.heapStart - at)));
+        digest.update(piece);
+        if (!inflater.feed(piece)) refuse("the table of contents cannot be decompressed");
+        at += piece.size();
+    }
+    if (!inflater.complete()) refuse("the table of contents cannot be decompressed");
+    foundation::ByteReader stated(start);
+    stated.seek(16, "uncompressed length");
+    if (stated.be64("uncompressed length") != length)
+        refuse("the header states another length of the table of contents");
+    archive.table = reader.finish();
+    archive.algorithm = header->algorithm;
+    archive.computed = digest.finish();
+    return archive;
+}
+
+/// A range of the heap as one of the file; `nullopt` if it lies outside.
+std::optional<FileRange> inFile(const Archive& archive, const FileRange& range, std::uint64_t end) {
+    const std::uint64_t heap = end - archive.heapStart;
+    if (range.offset > heap || range.length > heap - range.offset) return std::nullopt;
+    return FileRange{archive.heapStart + range.offset, range.length};
+}
+
+/// Whether it was meant to be an archive, as far as that shows in a damaged header too.
+bool beginsAsArchive(const ByteSource& source) {
+    constexpr std::uint32_t kMagic = 0x78617221;
+    constexpr std::uint16_t kVersion = 1;
+    if (source.size() < xar::kFixedHeaderSize) return false;
+    const Data start = source.read(0, xar::kFixedHeaderSize);
+    foundation::ByteReader reader(start);
+    if (reader.be32("magic") == kMagic) return true;
+    return reader.be16("header size") == xar::kFixedHeaderSize && reader.be16("version") == kVersion;
+}
+
+class PackageCheck {
+  public:
+    PackageCheck(const ByteSource& source, Workers& workers, Section& section)
+        : source_(source), workers_(workers), section_(section) {}
+
+    VerifiedCode run() {
+        end_ = endOfArchive(source_, section_);
+        archive_ = readArchive(source_, end_);
+        section_.pass(kArchive, "archive",
+                      format("a table of contents with %zu files", archive_.table.files.size()));
+        VerifiedCode code;
+        code.isSigned = std::any_of(archive_.table.signatures.begin(), archive_.table.signatures.end(),
+                                    [](const ArchiveSignature& one) { return one.style == kCmsStyle; });
+        checkTable();
+        checkSignatures(code);
+        checkFiles();
+        checkHeap();
+        return code;
+    }
+
+  private:
+    void checkTable() {
+        constexpr const char* kPlace = "table of contents";
+        const auto range =
+            archive_.table.checksum ? inFile(archive_, *archive_.table.checksum, end_) : std::nullopt;
+        if (archive_.algorithm == xar::DigestAlgorithm::none || !range ||
+            range->length != xar::digestSize(archive_.algorithm) ||
+            xar::digestAlgorithmNamed(archive_.table.checksumStyle) != archive_.algorithm) {
+            section_.fail(kTableChecksum, kPlace, "a checksum of the header's kind", "none");
+            return;
+        }
+        archive_.stored = source_.read(range->offset, static_cast<std::size_t>(range->length));
+        const std::string stored = foundation::toHex(archive_.stored);
+        if (archive_.stored == archive_.computed) {
+            section_.pass(kTableChecksum, kPlace, stored);
+        } else {
+            section_.fail(kTableChecksum, kPlace, stored, foundation::toHex(archive_.computed));
+        }
+    }
+
+    void checkSignatures(VerifiedCode& code) {
+        constexpr const char* kWanted = "a signature over the checksum of the table of contents";
+        std::size_t number = 0;
+        for (const ArchiveSignature& signature : archive_.table.signatures) {
+            const std::string place = format("signature %zu (%@)", ++number, signature.style);
+            if (signature.style != kCmsStyle) {
+                section_.skip(kArchiveSignature, place, "signatures of this style are not looked at");
+                continue;
+            }
+            const auto range = signature.range ? inFile(archive_, *signature.range, end_) : std::nullopt;
+            if (!range || range->length > kMaximumSignature) {
+                section_.fail(kArchiveSignature, place, kWanted, "it lies outside the archive");
+                continue;
+            }
+            const Data bytes = source_.read(range->offset, static_cast<std::size_t>(range->length));
+            const ByteView message = withoutPadding(bytes);
+            try {
+                if (archive_.stored.empty()) refuse("there is no checksum that it could be over");
+                codesign::requireDetachedCms(message, archive_.stored);
+                section_.pass(kArchiveSignature, place, kWanted);
+                addIdentity(message, code);
+            } catch (const CodeError& error) {
+                section_.fail(kArchiveSignature, place, kWanted, error.what());
+            }
+        }
+    }
+
+    void addIdentity(ByteView message, VerifiedCode& code) const {
+        if (!code.identities.empty()) return;
+        CodeIdentity identity;
+        identity.place = "package";
+        identity.codeHashes = {archive_.stored};
+        identity.hasSecureTimestamp = codesign::secureTimestamp(message).has_value();
+        code.identities.push_back(std::move(identity));
+    }
+
+    /// A message that states its length, without the zeros that fill the space set aside for it.
+    static ByteView withoutPadding(ByteView bytes) {
+        try {
+            foundation::ByteReader reader(bytes);
+            reader.skip(1, "tag");
+            std::uint64_t length = reader.u8("length");
+            constexpr std::uint64_t kLongForm = 0x80;
+            if (length > kLongForm) {
+                const std::uint64_t count = length - kLongForm;
+                if (count > 4) return bytes;
+                length = 0;
+                for (std::uint64_t i = 0; i < count; ++i) length = length << 8U | reader.u8("length");
+            } else if (length == kLongForm) {
+                return bytes;  // it ends where its contents say
+            }
+            if (length > reader.remaining()) return bytes;
+            const std::size_t end = reader.position() + static_cast<std::size_t>(length);
+            const ByteView rest = bytes.subspan(end);
+            const bool isZeros =
+                std::all_of(rest.begin(), rest.end(), [](std::byte byte) { return byte == std::byte{0}; });
+            return isZeros ? bytes.first(end) : bytes;
+        } catch (const foundation::ShortRead&) {
+            return bytes;
+        }
+    }
+
+    std::string placeOf(const ArchivedData& data) const {
+        const std::string path = archive_.table.pathOf(data.file);
+        return data.isAttribute ? path + ", extended attribute" : path;
+    }
+
+    struct Fault {
+        const ArchivedData* data;
+        Outcome outcome;
+        std::string found;
+    };
+
+    void checkFiles() {
+        const std::vector<ArchivedData>& all = archive_.table.data;
+        std::vector<Fault> faults;
+        std::mutex mutex;
+        workers_.forEach(all.size(), [&](std::size_t i) {
+            Outcome outcome = Outcome::failed;
+            std::string found = faultOf(all[i], outcome);
+            if (found.empty()) return;
+            const std::lock_guard lock(mutex);
+            faults.push_back({&all[i], outcome, std::move(found)});
+        });
+        std::sort(faults.begin(), faults.end(),
+                  [](const Fault& a, const Fault& b) { return a.data < b.data; });
+        FailureList failures(section_, kArchivedFile);
+        for (Fault& fault : faults)
+            failures.add(fault.outcome, placeOf(*fault.data), foundation::toHex(fault.data->checksum),
+                         std::move(fault.found));
+        if (failures.count() == 0)
+            section_.pass(kArchivedFile, "heap", format("%zu entries with their checksums", all.size()));
+    }
+
+    /// Empty if the bytes are as the table says.
+    std::string faultOf(const ArchivedData& data, Outcome& outcome) const {
+        if (!data.problem.empty()) return data.problem;
+        const auto range = inFile(archive_, data.range, end_);
+        if (!range) return "it lies outside the archive";
+        try {
+            const ByteView found = digestOf(*data.algorithm, source_, *range);
+            const bool isSame =
+                std::equal(found.begin(), found.end(), data.checksum.begin(), data.checksum.end());
+            return isSame ? std::string() : foundation::toHex(found);
+        } catch (const CodeError& error) {
+            outcome = Outcome::unreadable;
+            return error.what();
+        }
+    }
+
+    struct Claim {
+        FileRange range;
+        std::string what;
+    };
+
+    std::vector<Claim> claims() const {
+        std::vector<Claim> all;
+        if (archive_.table.checksum) all.push_back({*archive_.table.checksum, "the checksum"});
+        for (const ArchiveSignature& signature : archive_.table.signatures)
+            if (signature.range) all.push_back({*signature.range, "a signature"});
+        for (const ArchivedData& data : archive_.table.data)
+            if (data.problem.empty() && data.range.length > 0) all.push_back({data.range, placeOf(data)});
+        std::sort(all.begin(), all.end(), [](const Claim& a, const Claim& b) {
+            return std::pair(a.range.offset, a.range.length) < std::pair(b.range.offset, b.range.length);
+        });
+        return all;
+    }
+
+    // Two files of the same contents may share them; no other bytes belong to two.
+    void checkHeap() {
+        FailureList overlaps(section_, kHeap);
+        FailureList gaps(section_, kHeap);
+        const std::uint64_t heap = end_ - archive_.heapStart;
+        std::uint64_t claimed = 0;  // all before it belongs to something, or was reported
+        const Claim* last = nullptr;
+        const std::vector<Claim> all = claims();
+        for (const Claim& claim : all) {
+            if (claim.range.offset > heap || claim.range.length > heap - claim.range.offset) continue;
+            const bool isShared = last != nullptr && last->range == claim.range;
+            if (isShared) continue;
+            if (claim.range.offset < claimed)
+                overlaps.add(Outcome::failed, claim.what, "bytes of its own",
+                             "bytes of " + last->what + " too");
+            else
+                reportGap(claimed, claim.range.offset, gaps);
+            if (claim.range.offset + claim.range.length > claimed) {
+                claimed = claim.range.offset + claim.range.length;
+                last = &claim;
+            }
+        }
+        reportGap(claimed, heap, gaps);
+        if (overlaps.count() == 0) section_.pass(kHeap, "heap", "entries that do not overlap");
+    }
+
+    void reportGap(std::uint64_t begin, std::uint64_t end, FailureList& gaps) const {
+        if (begin >= end) return;
+        gaps.add(
+            Outcome::noted,
+            format("heap (bytes %llu to %llu)", archive_.heapStart + begin, archive_.heapStart + end - 1),
+            "bytes that an entry claims", format("%llu bytes that nothing claims", end - begin));
+    }
+
+    const ByteSource& source_;
+    Workers& workers_;
+    Section& section_;
+    std::uint64_t end_ = 0;
+    Archive archive_;
+};
+
+}  // namespace
+
+VerifiedCode verifyPackage(const ByteSource& source, Workers& workers, Section& section) {
+    try {
+        return PackageCheck(source, workers, section).run();
+    } catch (const CodeError& error) {
+        if (error.status() == codesign::kIOError) {
+            section.cannotRead(kArchive, "archive", error.what());
+        } else {
+            section.fail(kArchive, "archive", "a well-formed archive", error.what());
+        }
+    } catch (const foundation::ShortRead& error) {
+        section.fail(kArchive, "archive", "a well-formed archive", error.what());
+    }
+    return {.isSigned = beginsAsArchive(source), .identities = {}};
 }
 
 }  // namespace pinwell::verify

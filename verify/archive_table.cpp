@@ -1,0 +1,293 @@
+#include "verify/archive_table.h"
+
+#include <algorithm>
+#include <charconv>
+#include <utility>
+
+#include "codesign/code_error.h"
+#include "foundation/xml_parser.h"
+#include "xar/digest.h"
+
+namespace pinwell::verify {
+
+using codesign::FileRange;
+using codesign::refuse;
+
+namespace {
+
+/// Longest text that is kept: digests in hexadecimal are up to 128 characters.
+constexpr std::size_t kMaximumText = kMaximumArchivedName;
+
+std::string_view trimmed(std::string_view text) {
+    constexpr std::string_view kBlank = " \t\r\n";
+    const std::size_t begin = text.find_first_not_of(kBlank);
+    if (begin == std::string_view::npos) return {};
+    return text.substr(begin, text.find_last_not_of(kBlank) + 1 - begin);
+}
+
+std::optional<std::uint64_t> numberFrom(std::string_view text) {
+    text = trimmed(text);
+    std::uint64_t number = 0;
+    const auto result = std::from_chars(text.data(), text.data() + text.size(), number);
+    if (result.ec != std::errc{} || result.ptr != text.data() + text.size()) return std::nullopt;
+    return number;
+}
+
+std::optional<Data> bytesFrom(std::string_view text) {
+    text = trimmed(text);
+    if (text.size() % 2 != 0) return std::nullopt;
+    Data bytes;
+    for (std::size_t at = 0; at < text.size(); at += 2) {
+        unsigned value = 0;
+        const auto result = std::from_chars(text.data() + at, text.data() + at + 2, value, 16);
+        if (result.ec != std::errc{} || result.ptr != text.data() + at + 2) return std::nullopt;
+        bytes.push_back(static_cast<std::byte>(value));
+    }
+    return bytes;
+}
+
+std::optional<Algorithm> algorithmNamed(std::string_view style) {
+    switch (xar::digestAlgorithmNamed(style).value_or(xar::DigestAlgorithm::none)) {
+        case xar::DigestAlgorithm::md5:
+            return Algorithm::md5;
+        case xar::DigestAlgorithm::sha1:
+            return Algorithm::sha1;
+        case xar::DigestAlgorithm::sha224:
+            return Algorithm::sha224;
+        case xar::DigestAlgorithm::sha256:
+            return Algorithm::sha256;
+        case xar::DigestAlgorithm::sha384:
+            return Algorithm::sha384;
+        case xar::DigestAlgorithm::sha512:
+            return Algorithm::sha512;
+        case xar::DigestAlgorithm::none:
+            break;
+    }
+    return std::nullopt;
+}
+
+/// What an element with a place in the heap says of it. A second word on one thing makes it none.
+struct Described {
+    std::optional<std::uint64_t> offset;
+    std::optional<std::uint64_t> length;
+    std::optional<Data> checksum;
+    std::optional<Algorithm> algorithm;
+    bool isAmbiguous = false;
+    bool saysAnything = false;
+
+    template <class T>
+    void set(std::optional<T>& where, std::optional<T> value) {
+        saysAnything = true;
+        // What cannot be read is as if it had been said twice.
+        isAmbiguous = isAmbiguous || where || !value;
+        where = std::move(value);
+    }
+
+    std::optional<FileRange> range() const {
+        if (isAmbiguous || !offset || !length) return std::nullopt;
+        return FileRange{*offset, *length};
+    }
+};
+
+}  // namespace
+
+std::string ArchiveTable::pathOf(std::size_t file) const {
+    std::string path = files[file].name;
+    for (std::optional<std::size_t> parent = files[file].parent; parent; parent = files[*parent].parent)
+        path.insert(0, files[*parent].name + "/");
+    return path;
+}
+
+class ArchiveTableReader::Document final : public foundation::XMLEvents {
+  public:
+    void feed(ByteView bytes) {
+        try {
+            parser_.feed(bytes);
+        } catch (const foundation::MalformedXML& error) {
+            refuse(std::string("the table of contents is no XML: ") + error.what());
+        }
+    }
+
+    ArchiveTable finish() {
+        try {
+            parser_.finish();
+        } catch (const foundation::MalformedXML& error) {
+            refuse(std::string("the table of contents is no XML: ") + error.what());
+        }
+        if (!hasTable_) refuse("the archive has no table of contents");
+        return std::move(table_);
+    }
+
+    void begin(std::string_view name, const foundation::XMLAttributes& attributes) override {
+        const Place around = open_.empty() ? Place::outside : open_.back();
+        if (open_.size() == kMaximumTableDepth) refuse("the table of contents is too deep");
+        open_.push_back(placeOf(withoutPrefix(name), around));
+        text_.clear();
+        switch (open_.back()) {
+            case Place::table:
+                if (std::exchange(hasTable_, true)) refuse("two tables of contents");
+                break;
+            case Place::file:
+                beginFile();
+                break;
+            case Place::checksum:
+            case Place::signature:
+            case Place::data:
+            case Place::attribute:
+                described_ = {};
+                style_ = attributes["style"].value_or("");
+                break;
+            case Place::archivedChecksum:
+                described_.set(described_.algorithm, algorithmNamed(attributes["style"].value_or("")));
+                break;
+            default:
+                break;
+        }
+    }
+
+    void end(std::string_view) override {
+        switch (open_.back()) {
+            case Place::file:
+                around_.pop_back();
+                break;
+            case Place::name:
+                table_.files[around_.back()].name = text_;
+                break;
+            case Place::offset:
+                described_.set(described_.offset, numberFrom(text_));
+                break;
+            case Place::length:
+                described_.set(described_.length, numberFrom(text_));
+                break;
+            case Place::archivedChecksum:
+                described_.set(described_.checksum, bytesFrom(text_));
+                break;
+            case Place::checksum:
+                if (table_.checksum) refuse("the archive has two checksums");
+                table_.checksum = described_.range();
+                table_.checksumStyle = style_;
+                break;
+            case Place::signature:
+                add(table_.signatures, {style_, described_.range()});
+                break;
+            case Place::data:
+            case Place::attribute:
+                endData(open_.back() == Place::attribute);
+                break;
+            default:
+                break;
+        }
+        open_.pop_back();
+        text_.clear();
+    }
+
+    void text(std::string_view piece) override {
+        const std::size_t room = kMaximumText - std::min(text_.size(), kMaximumText);
+        // A longer number or digest is none; a longer name is shown cut.
+        text_.append(piece.substr(0, room));
+    }
+
+  private:
+    enum class Place {
+        outside,
+        root,
+        table,
+        file,
+        name,
+        data,
+        attribute,
+        checksum,
+        signature,
+        offset,
+        length,
+        archivedChecksum,
+        other,
+    };
+
+    static std::string_view withoutPrefix(std::string_view name) {
+        const std::size_t colon = name.rfind(':');
+        return colon == std::string_view::npos ? name : name.substr(colon + 1);
+    }
+
+    static Place placeOf(std::string_view name, Place around) {
+        switch (around) {
+            case Place::outside:
+                if (name != "xar") refuse("the table of contents is none of an archive");
+                return Place::root;
+            case Place::root:
+                return name == "toc" ? Place::table : Place::other;
+            case Place::table:
+                if (name == "checksum") return Place::checksum;
+                if (name == "signature" || name == "x-signature") return Place::signature;
+                return name == "file" ? Place::file : Place::other;
+            case Place::file:
+                if (name == "file") return Place::file;
+                if (name == "name") return Place::name;
+                if (name == "data") return Place::data;
+                return name == "ea" ? Place::attribute : Place::other;
+            case Place::checksum:
+            case Place::signature:
+                if (name == "size") return Place::length;
+                return name == "offset" ? Place::offset : Place::other;
+            case Place::data:
+            case Place::attribute:
+                if (name == "length") return Place::length;
+                if (name == "archived-checksum") return Place::archivedChecksum;
+                return name == "offset" ? Place::offset : Place::other;
+            default:
+                return Place::other;
+        }
+    }
+
+    void beginFile() {
+        const std::optional<std::size_t> parent =
+            around_.empty() ? std::nullopt : std::optional(around_.back());
+        around_.push_back(table_.files.size());
+        add(table_.files, {std::string(), parent});
+    }
+
+    void endData(bool isAttribute) {
+        if (!described_.saysAnything) return;
+        ArchivedData data{
+            .file = around_.back(), .isAttribute = isAttribute, .range = {}, .checksum = {}, .problem = {}};
+        const std::optional<FileRange> range = described_.range();
+        if (!range) {
+            data.problem = "the table does not say once where it is";
+        } else if (!described_.checksum || !described_.algorithm ||
+                   described_.checksum->size() != digestLength(*described_.algorithm)) {
+            data.problem = "the table has no checksum of it";
+        }
+        data.range = range.value_or(FileRange());
+        data.algorithm = described_.algorithm;
+        data.checksum = described_.checksum.value_or(Data());
+        add(table_.data, std::move(data));
+    }
+
+    template <class T>
+    static void add(std::vector<T>& list, T item) {
+        if (list.size() == kMaximumArchivedFiles) refuse("the table of contents has too many entries");
+        list.push_back(std::move(item));
+    }
+
+    ArchiveTable table_;
+    std::vector<Place> open_;
+    std::vector<std::size_t> around_;  // the files that are open
+    Described described_;
+    std::string style_;
+    std::string text_;
+    bool hasTable_ = false;
+    foundation::XMLParser parser_{*this, foundation::XMLParser::DocumentType::refused};
+};
+
+ArchiveTableReader::ArchiveTableReader() : document_(std::make_unique<Document>()) {}
+ArchiveTableReader::~ArchiveTableReader() = default;
+
+void ArchiveTableReader::feed(ByteView bytes) {
+    document_->feed(bytes);
+}
+
+ArchiveTable ArchiveTableReader::finish() {
+    return document_->finish();
+}
+
+}  // namespace pinwell::verify
