@@ -1,4 +1,6 @@
 // Faults of one certificate, put into each place of a chain in turn.
+#include <algorithm>
+
 #include "chain_vocabulary.h"
 #include "support/key_forms.h"
 #include "support/ticket_builder.h"

@@ -30,6 +30,7 @@ struct ChainFault {
     std::function<void(Scene&, const ChainFields&)> arrangement = nullptr;
     std::string host = kHost;
 };
+
 /// The same chain in every word, of other keys.
 IssuedChain impostorOf(ChainFields fields) {
     fields.root.key = SigningKey::cached(KeyKind::p256, "impostor root");

@@ -220,7 +220,7 @@ void sign(X509* certificate, const SigningKey& signer, const CertificateFields& 
     require(X509_sign_ctx(certificate, signingContext(signer, fields).get()) > 0, "signing");
 }
 
-Data joined(std::initializer_list<Data> parts) {
+Data endToEnd(std::initializer_list<Data> parts) {
     ByteWriter writer;
     for (const Data& part : parts) writer.bytes(part);
     return std::move(writer).take();
@@ -235,12 +235,12 @@ Data edited(const Data& der, const CertificateFields& fields, const SigningKey& 
         const auto number = static_cast<std::uint8_t>(fields.version - 1);
         all.version =
             fields.version == 1 ? Data{} : derElement(0xA0, derElement(0x02, ByteWriter().u8(number).data()));
-        if (trust::der::readElement(all.extensions)->contents.size() <= 2) all.extensions.clear();
     }
     if (fields.edit) fields.edit(all);
-    const Data body = derElement(0x30, joined({all.version, all.serialNumber, all.innerAlgorithm, all.issuer,
-                                               all.validity, all.subject, all.key, all.issuerUniqueIdentifier,
-                                               all.subjectUniqueIdentifier, all.extensions}));
+    const Data body = derElement(
+        0x30,
+        endToEnd({all.version, all.serialNumber, all.innerAlgorithm, all.issuer, all.validity, all.subject,
+                  all.key, all.issuerUniqueIdentifier, all.subjectUniqueIdentifier, all.extensions}));
     if (!all.signature) {
         const DigestHandle context = signingContext(signer, fields);
         std::size_t size = 0;
@@ -253,7 +253,7 @@ Data edited(const Data& der, const CertificateFields& fields, const SigningKey& 
         bits.resize(size);
         all.signature = derElement(0x03, ByteWriter().u8(0).bytes(bits).data());
     }
-    return derElement(0x30, joined({body, all.outerAlgorithm, *all.signature}));
+    return derElement(0x30, endToEnd({body, all.outerAlgorithm, *all.signature}));
 }
 
 }  // namespace

@@ -14,16 +14,16 @@ using foundation::ByteView;
 using foundation::ByteWriter;
 using foundation::Data;
 
-constexpr std::uint8_t kSequence = 0x30;
-constexpr std::uint8_t kBitString = 0x03;
-constexpr std::uint8_t kInteger = 0x02;
+constexpr std::uint8_t kInfoSequence = 0x30;
+constexpr std::uint8_t kInfoBits = 0x03;
+constexpr std::uint8_t kInfoNumber = 0x02;
 
-struct Info {
+struct KeyInfo {
     Data algorithm;  // an element
     Data bits;       // of the key, without the count of unused ones
 };
 
-Info read(ByteView info) {
+KeyInfo readInfo(ByteView info) {
     const auto whole = trust::der::readElement(info);
     const auto algorithm = whole ? trust::der::readElement(whole->contents) : std::nullopt;
     const auto bits =
@@ -32,23 +32,23 @@ Info read(ByteView info) {
     return {foundation::toData(algorithm->whole), foundation::toData(bits->contents.subspan(1))};
 }
 
-Data written(ByteView algorithm, ByteView bits) {
-    const Data key = derElement(kBitString, ByteWriter().u8(0).bytes(bits).data());
-    return derElement(kSequence, ByteWriter().bytes(algorithm).bytes(key).data());
+Data writtenInfo(ByteView algorithm, ByteView bits) {
+    const Data key = derElement(kInfoBits, ByteWriter().u8(0).bytes(bits).data());
+    return derElement(kInfoSequence, ByteWriter().bytes(algorithm).bytes(key).data());
 }
 
 Data withPointForm(ByteView info, std::uint8_t form, bool keepsY) {
-    const Info parts = read(info);
+    const KeyInfo parts = readInfo(info);
     const ByteView coordinates = ByteView(parts.bits).subspan(1);
     const bool isOdd = (coordinates.back() & std::byte{1}) != std::byte{0};
-    return written(parts.algorithm, ByteWriter()
-                                        .u8(static_cast<std::uint8_t>(form + (isOdd ? 1 : 0)))
-                                        .bytes(coordinates.first(coordinates.size() / (keepsY ? 1 : 2)))
-                                        .data());
+    return writtenInfo(parts.algorithm, ByteWriter()
+                                            .u8(static_cast<std::uint8_t>(form + (isOdd ? 1 : 0)))
+                                            .bytes(coordinates.first(coordinates.size() / (keepsY ? 1 : 2)))
+                                            .data());
 }
 
-constexpr std::string_view kRsa("\x30\x0D\x06\x09\x2A\x86\x48\x86\xF7\x0D\x01\x01\x01\x05\x00", 15);
-constexpr std::string_view kPss("\x30\x0B\x06\x09\x2A\x86\x48\x86\xF7\x0D\x01\x01\x0A", 13);
+constexpr std::string_view kRsaAlgorithm("\x30\x0D\x06\x09\x2A\x86\x48\x86\xF7\x0D\x01\x01\x01\x05\x00", 15);
+constexpr std::string_view kPssAlgorithm("\x30\x0B\x06\x09\x2A\x86\x48\x86\xF7\x0D\x01\x01\x0A", 13);
 
 }  // namespace
 
@@ -64,23 +64,23 @@ Data hybridPoint(ByteView info) {
 
 Data onDescribedCurve(ByteView info) {
     const Data described = SigningKey::cached(KeyKind::p256Described, "description").publicKeyInfo();
-    return underAlgorithm(info, read(described).algorithm);
+    return underAlgorithm(info, readInfo(described).algorithm);
 }
 
 Data asPssKey(ByteView info) {
-    return underAlgorithm(info, foundation::asBytes(kPss));
+    return underAlgorithm(info, foundation::asBytes(kPssAlgorithm));
 }
 
 Data underAlgorithm(ByteView info, ByteView algorithm) {
-    return written(algorithm, read(info).bits);
+    return writtenInfo(algorithm, readInfo(info).bits);
 }
 
 Data rsaKey(ByteView modulus, ByteView exponent) {
-    return written(
-        foundation::asBytes(kRsa),
-        derElement(
-            kSequence,
-            ByteWriter().bytes(derElement(kInteger, modulus)).bytes(derElement(kInteger, exponent)).data()));
+    return writtenInfo(foundation::asBytes(kRsaAlgorithm),
+                       derElement(kInfoSequence, ByteWriter()
+                                                     .bytes(derElement(kInfoNumber, modulus))
+                                                     .bytes(derElement(kInfoNumber, exponent))
+                                                     .data()));
 }
 
 }  // namespace pinwell::test
