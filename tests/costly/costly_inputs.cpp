@@ -8,7 +8,7 @@ namespace {
 
 std::vector<CostlyInput> allRows() {
     std::vector<CostlyInput> rows;
-    for (const auto& group : {archiveInputs, jsonInputs, propertyListInputs}) {
+    for (const auto& group : {archiveInputs, certificateInputs, jsonInputs, propertyListInputs}) {
         std::vector<CostlyInput> more = group();
         rows.insert(rows.end(), std::make_move_iterator(more.begin()), std::make_move_iterator(more.end()));
     }
