@@ -1,6 +1,7 @@
 // A table of chains, each with its verdict.
 #include <gtest/gtest.h>
 
+#include "elements.h"
 #include "scene.h"
 
 namespace pinwell::trust {
@@ -172,6 +173,19 @@ INSTANTIATE_TEST_SUITE_P(PinnedServer, Chain, testing::Values(
     Row{"PurposeOfAClient", Kind::pinned, kRefused, [](ChainFields& c) { c.leaf.extendedKeyUsage = "clientAuth"; }},
     Row{"NoPurposeNamed", Kind::pinned, kRefused, [](ChainFields& c) { c.leaf.extendedKeyUsage.clear(); }},
     Row{"AnyPurposeNamed", Kind::pinned, kRefused, [](ChainFields& c) { c.leaf.extendedKeyUsage = "anyExtendedKeyUsage"; }},
+    Row{"IntermediateForClientsOnly", Kind::pinned, kRefused, [](ChainFields& c) { c.intermediate.extendedKeyUsage = "clientAuth"; }},
+    Row{"RootForClientsOnly", Kind::pinned, kRefused, [](ChainFields& c) { c.root.extendedKeyUsage = "critical,clientAuth"; }},
+    Row{"IntermediateForAnyPurpose", Kind::pinned, kTrusted, [](ChainFields& c) { c.intermediate.extendedKeyUsage = "anyExtendedKeyUsage"; }},
+    Row{"IntermediateForServersAndOthers", Kind::pinned, kTrusted, [](ChainFields& c) { c.intermediate.extendedKeyUsage = "clientAuth,serverAuth"; }},
+    Row{"LeafWhoseKeyUsageIsNoneOfTls", Kind::pinned, kRefused, [](ChainFields& c) { c.leaf.keyUsage = "critical,nonRepudiation"; }},
+    Row{"LeafForKeyAgreement", Kind::pinned, kTrusted, [](ChainFields& c) { c.leaf.keyUsage = "critical,keyAgreement"; }},
+    Row{"HostExcludedByTheIntermediate", Kind::pinned, kRefused, [](ChainFields& c) { c.intermediate.nameConstraints = "excluded;DNS:lumora.example"; }},
+    Row{"HostExcludedByTheRoot", Kind::pinned, kRefused, [](ChainFields& c) { c.root.nameConstraints = "critical,excluded;DNS:api.lumora.example"; }},
+    Row{"HostPermittedByTheRoot", Kind::pinned, kTrusted, [](ChainFields& c) { c.root.nameConstraints = "critical,permitted;DNS:lumora.example"; }},
+    Row{"AnotherNameNotPermitted", Kind::pinned, kRefused, [](ChainFields& c) { c.leaf.subjectAlternativeNames += ",DNS:other.example"; c.root.nameConstraints = "permitted;DNS:lumora.example"; }},
+    Row{"MailConstrainedByTheRoot", Kind::pinned, kRefused, [](ChainFields& c) { c.root.nameConstraints = "permitted;email:lumora.example"; }},
+    Row{"NameConstraintsOfTheLeaf", Kind::pinned, kTrusted, [](ChainFields& c) { c.leaf.nameConstraints = "critical,excluded;DNS:lumora.example"; }},
+    Row{"PoliciesCritical", Kind::pinned, kTrusted, [](ChainFields& c) { c.intermediate.extensions = {{"2.5.29.32", true, derElement(0x30, derElement(0x30, bytes({6, 2, 0x2A, 3})))}}; }},
     Row{"IntermediateNoAuthority", Kind::pinned, kRefused, [](ChainFields& c) { c.intermediate.basicConstraints = BasicConstraints{false}; }},
     Row{"RootOnlyAmongCompatibilityRoots", Kind::pinned, kRefused, kAsItShouldBe, [](Scene& s) { s.roots.swap(s.compatibility); }},
     Row{"LeafKeyRsa1024", Kind::pinned, kRefused, [](ChainFields& c) { c.leaf.key = SigningKey::cached(KeyKind::rsa1024, "l"); }},
