@@ -24,7 +24,9 @@ struct Free {
 // FNV-1a over the path, whichever way it is spelled, whose low bits are then mixed with the high ones.
 std::uint64_t partOf(std::string_view path, std::uint64_t parts) {
     std::uint64_t hash = 0xCBF29CE484222325;
-    for (const char c : std::filesystem::path(path).lexically_normal().native()) {
+    // A value of its own: a loop over native() of a temporary would read what is gone.
+    const std::filesystem::path normal = std::filesystem::path(path).lexically_normal();
+    for (const char c : normal.native()) {
         hash ^= static_cast<unsigned char>(c);
         hash *= 0x100000001B3;
     }
