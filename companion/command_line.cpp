@@ -53,7 +53,7 @@ std::string helpLine(const std::string& what, const std::string& help) {
 }
 
 std::string optionHelp(const Option& option) {
-    std::string what = option.letter == 0 ? "    " : std::string("-") + option.letter + ", ";
+    std::string what = option.letter == 0 ? "    " : std::string("-") + option.letter + ",";
     what += "--" + option.name;
     if (!option.argument.empty()) what += " " + option.argument;
     return helpLine(what, option.help);
@@ -64,7 +64,7 @@ std::string helpOf(const Program& program) {
     for (const Command& command : program.commands)
         text += (&command == &program.commands.front() ? "Usage: " : "       ") + program.name + " " +
                 command.name + " [OPTION]... [--] " + command.arguments + "\n";
-    text += "\nCommands:\n";
+    text += "\nSubcommands:\n";
     for (const Command& command : program.commands) text += helpLine(command.name, command.help);
     text += "\n" + program.name + " COMMAND --help lists the options of a command.\n";
     return text + (program.epilogue.empty() ? "" : "\n" + program.epilogue + "\n");
@@ -74,7 +74,7 @@ std::string helpOf(const Program& program, const Command& command) {
     std::string text = "Usage: " + program.name + " " + command.name + " [OPTION]... [--] " +
                        command.arguments + "\n" + command.help + "\n\nOptions:\n";
     for (const Option& option : command.options) text += optionHelp(option);
-    text += helpLine("-h, --help", "Print this help");
+    text += helpLine("-h,--help", "Print this help");
     text += helpLine("    --version", "Print the version");
     return text + (program.epilogue.empty() ? "" : "\n" + program.epilogue + "\n");
 }
