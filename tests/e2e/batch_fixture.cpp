@@ -1,0 +1,131 @@
+#include "batch_fixture.h"
+
+#include <algorithm>
+
+#include "foundation/base64.h"
+#include "foundation/json.h"
+
+namespace pinwell::test {
+
+using testing::AllOf;
+using testing::ResultOf;
+
+testing::Matcher<const Value&> Reports(const std::string& cause, int exitStatus) {
+    return AllOf(
+        ResultOf(
+            "cause",
+            [](const Value& line) {
+                const std::string* const text = line["cause"].string();
+                return text == nullptr ? std::string() : *text;
+            },
+            cause),
+        ResultOf(
+            "exit status", [](const Value& line) { return line["exitStatus"].unsignedIntegerValue(); },
+            static_cast<std::uint64_t>(exitStatus)));
+}
+
+Command BatchTest::batchCommand(std::vector<std::string> arguments) const {
+    Command made = command(std::move(arguments));
+    made.executable = PINWELL_BATCH_PROGRAM;
+    return made;
+}
+
+ProcessResult BatchTest::batch(std::vector<std::string> arguments) const {
+    return runProcess(batchCommand(std::move(arguments)));
+}
+
+ProcessResult BatchTest::batch(std::vector<std::string> arguments,
+                               const std::vector<Artefact>& images) const {
+    for (const Artefact& image : images) arguments.push_back(image.path);
+    return batch(std::move(arguments));
+}
+
+Command BatchTest::ticketCommand(std::vector<std::string> arguments) const {
+    Command made = command(std::move(arguments));
+    made.executable = PINWELL_TICKET_PROGRAM;
+    return made;
+}
+
+ProcessResult BatchTest::ticketTool(std::vector<std::string> arguments) const {
+    return runProcess(ticketCommand(std::move(arguments)));
+}
+
+std::vector<Artefact> BatchTest::writeImages(std::size_t count, const std::string& folder) {
+    std::vector<Artefact> images;
+    for (std::size_t i = 0; i < count; ++i) {
+        const std::string number = std::to_string(i);
+        images.push_back(writeArtefact(unsignedImage(foundation::toData("image " + folder + number)),
+                                       directory / (folder + "/Image" + number + ".dmg")));
+        records[recordNameOf(images.back())] = ticketOf(images.back());
+    }
+    return images;
+}
+
+std::vector<std::string> BatchTest::pathsOf(const std::vector<Artefact>& artefacts) {
+    std::vector<std::string> paths;
+    for (const Artefact& artefact : artefacts) paths.push_back(artefact.path);
+    return paths;
+}
+
+std::vector<std::string> BatchTest::namesIn(const RecordedRequest& request) {
+    std::vector<std::string> names;
+    const auto body = foundation::parseJSON(foundation::asBytes(request.body));
+    if (!body) return names;
+    for (const Value& record : *(*body)["records"].array()) names.push_back(*record["recordName"].string());
+    return names;
+}
+
+std::string BatchTest::bodyFor(const std::vector<std::string>& names) const {
+    std::string body;
+    for (const std::string& name : names) {
+        body += body.empty() ? "" : ",";
+        const auto found = records.find(name);
+        if (found == records.end() || !found->second)
+            body += R"({"recordName":")" + name +
+                    R"(","serverErrorCode":"NOT_FOUND","reason":"Record not found"})";
+        else
+            body += R"({"recordName":")" + name + R"(","fields":{"signedTicket":{"type":"BYTES","value":")" +
+                    foundation::encodeBase64(*found->second) + R"("}}})";
+    }
+    return R"({"records":[)" + body + "]}";
+}
+
+void BatchTest::serveRecords() {
+    service().setHandler(
+        [this](const RecordedRequest& request) { return answer(bodyFor(namesIn(request))); });
+}
+
+std::vector<std::size_t> BatchTest::groupSizes() {
+    std::vector<std::size_t> sizes;
+    for (const RecordedRequest& request : service().requests()) sizes.push_back(namesIn(request).size());
+    return sizes;
+}
+
+std::vector<Value> BatchTest::reportsOf(const ProcessResult& result) {
+    std::vector<Value> reports;
+    for (const std::string& line : result.outputLines()) {
+        const auto document = foundation::parseJSON(foundation::asBytes(line));
+        EXPECT_TRUE(document.has_value()) << line;
+        if (document && (*document)["summary"].isNil()) reports.push_back(*document);
+    }
+    return reports;
+}
+
+Value BatchTest::summaryOf(const ProcessResult& result) {
+    const std::vector<std::string> lines = result.outputLines();
+    if (lines.empty()) return {};
+    const auto document = foundation::parseJSON(foundation::asBytes(lines.back()));
+    return document ? (*document)["summary"] : Value();
+}
+
+bool BatchTest::isStapled(const Artefact& artefact, const Data& ticket) {
+    return readFile(artefact.file()) == artefact.stapledWith(ticket);
+}
+
+std::size_t BatchTest::countStapled(const std::vector<Artefact>& artefacts) const {
+    return static_cast<std::size_t>(std::count_if(
+        artefacts.begin(), artefacts.end(),
+        [&](const Artefact& one) { return isStapled(one, records.at(recordNameOf(one)).value()); }));
+}
+
+}  // namespace pinwell::test

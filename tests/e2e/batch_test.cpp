@@ -1,0 +1,430 @@
+// pinwell-batch as it is run: what it does with lists, what it says, and what it ends with.
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <filesystem>
+
+#include "batch_fixture.h"
+
+namespace pinwell::test {
+namespace {
+
+using testing::AllOf;
+using testing::Contains;
+using testing::Each;
+using testing::ElementsAre;
+using testing::EndsWith;
+using testing::HasSubstr;
+using testing::IsEmpty;
+using testing::Lt;
+using testing::Not;
+using testing::SizeIs;
+using testing::StartsWith;
+using testing::UnorderedElementsAre;
+
+class Batch : public BatchTest {
+  protected:
+    std::string list(const std::string& contents) const {
+        const std::string path = directory / "builds/list";
+        writeFile(path, contents);
+        return path;
+    }
+    static std::string joined(const std::vector<std::string>& lines, char end) {
+        std::string text;
+        for (const std::string& line : lines) text += line + end;
+        return text;
+    }
+};
+
+// What it does.
+
+TEST_F(Batch, StaplesEveryKindOfArtefact) {
+    std::vector<Artefact> artefacts;
+    for (const Artefact& one : {signedImage(), unsignedImage(), signedPackage(), signedBundle()}) {
+        artefacts.push_back(writeArtefact(one, directory / ("builds/" + one.name)));
+        records[recordNameOf(artefacts.back())] = ticketOf(artefacts.back());
+    }
+    serveRecords();
+    const ProcessResult result = batch({"staple", "--json"}, artefacts);
+    EXPECT_EQ(result.exitStatus, 0) << result.output << result.errors;
+    EXPECT_THAT(reportsOf(result), AllOf(SizeIs(4), Each(Reports("worked", 0))));
+    EXPECT_EQ(countStapled(artefacts), 4U);
+    EXPECT_THAT(groupSizes(), ElementsAre(4U));
+}
+
+TEST_F(Batch, ValidatesWhatItHasStapled) {
+    const auto images = writeImages(5);
+    serveRecords();
+    ASSERT_EQ(batch({"staple"}, images).exitStatus, 0);
+    const ProcessResult result = batch({"validate", "--json"}, images);
+    EXPECT_EQ(result.exitStatus, 0);
+    EXPECT_THAT(reportsOf(result), AllOf(SizeIs(5), Each(Reports("worked", 0))));
+}
+
+TEST_F(Batch, LooksUpTwoHundredNamesAtMostInOneRequest) {
+    const auto images = writeImages(450);
+    serveRecords();
+    EXPECT_EQ(batch({"staple", "-q"}, images).exitStatus, 0);
+    EXPECT_EQ(countStapled(images), 450U);
+    const auto sizes = groupSizes();
+    EXPECT_THAT(sizes, Each(testing::Le(200U)));
+    EXPECT_THAT(sizes, SizeIs(Lt(10U)));
+}
+
+TEST_F(Batch, AsksForARecordOfTwoArtefactsOnce) {
+    auto images = writeImages(2);
+    images[1] = writeArtefact(images[0], directory / "builds/many/Copy.dmg");
+    serveRecords();
+    const ProcessResult result = batch({"staple", "--json"}, images);
+    EXPECT_EQ(result.exitStatus, 0);
+    EXPECT_THAT(reportsOf(result), SizeIs(2));
+    EXPECT_EQ(countStapled(images), 2U);
+    EXPECT_THAT(groupSizes(), ElementsAre(1U));
+}
+
+// Causes and the exit status.
+
+TEST_F(Batch, SaysWhyEachArtefactEndedAsItDid) {
+    auto images = writeImages(6);
+    records[recordNameOf(images[1])] = std::nullopt;
+    records[recordNameOf(images[2])] = sealed(images[2].payload().revoked());
+    records[recordNameOf(images[3])] = ticketForOthers();
+    writeFile(images[4].path, "no image");
+    writeFile(directory / "builds/plain.txt", "text");
+    serveRecords();
+    auto paths = pathsOf(images);
+    paths.push_back(directory / "builds/missing.dmg");
+    paths.push_back(directory / "builds/plain.txt");
+    paths.insert(paths.begin(), {"staple", "--json", "--jobs", "1"});
+    const ProcessResult result = batch(paths);
+    EXPECT_EQ(result.exitStatus, 77);
+    std::map<std::string, std::string> causes;
+    for (const Value& report : reportsOf(result))
+        causes[std::filesystem::path(*report["path"].string()).filename()] = *report["cause"].string();
+    EXPECT_THAT(causes,
+                UnorderedElementsAre(
+                    testing::Pair("Image0.dmg", "worked"), testing::Pair("Image1.dmg", "notIssued"),
+                    testing::Pair("Image2.dmg", "revoked"), testing::Pair("Image3.dmg", "notAcceptable"),
+                    testing::Pair("Image4.dmg", "notReadable"), testing::Pair("Image5.dmg", "worked"),
+                    testing::Pair("missing.dmg", "notReadable"), testing::Pair("plain.txt", "unsupported")));
+    const Value summary = summaryOf(result);
+    EXPECT_EQ(summary["total"].unsignedIntegerValue(), 8U);
+    EXPECT_EQ(summary["worked"].unsignedIntegerValue(), 2U);
+    EXPECT_EQ(summary["exitStatus"].unsignedIntegerValue(), 77U);
+}
+
+TEST_F(Batch, AnUnsignedBundleHasNoHash) {
+    std::filesystem::remove_all(bundle + "/Contents/MacOS");
+    BundleBuilder().executable(foundation::toData("#!/bin/sh\n")).write(directory / "builds/Unsigned.app");
+    serveRecords();
+    const ProcessResult result = batch({"staple", "--json", directory / "builds/Unsigned.app"});
+    EXPECT_EQ(result.exitStatus, 66);
+    EXPECT_THAT(reportsOf(result), ElementsAre(Reports("notSigned", 66)));
+    EXPECT_THAT(service().requests(), IsEmpty());
+}
+
+TEST_F(Batch, AValidationWithoutATicketAsksNobody) {
+    const auto images = writeImages(2);
+    serveRecords();
+    const ProcessResult result = batch({"validate", "--json"}, images);
+    EXPECT_EQ(result.exitStatus, 65);
+    EXPECT_THAT(reportsOf(result), Each(Reports("notStapled", 65)));
+    EXPECT_THAT(service().requests(), IsEmpty());
+}
+
+TEST_F(Batch, TheWorstArtefactDecidesInTheOrderOfTheTable) {
+    const auto images = writeImages(3);
+    const std::string missing = directory / "builds/missing.dmg";
+    records[recordNameOf(images[1])] = std::nullopt;
+    serveRecords();
+    EXPECT_EQ(batch({"staple", "-q", images[0].path}).exitStatus, 0);
+    EXPECT_EQ(batch({"staple", "-q", images[0].path, missing}).exitStatus, 66);
+    EXPECT_EQ(batch({"staple", "-q", missing, images[1].path}).exitStatus, 65);
+    std::filesystem::permissions(directory / "builds/many", std::filesystem::perms::all);
+    serveNoMore();
+    EXPECT_EQ(batch({"staple", "-q", "--retries", "0", images[0].path}).exitStatus, 68);
+    EXPECT_EQ(batch({"staple", "-q", "--retries", "0", images[0].path, missing}).exitStatus, 66);
+}
+
+TEST_F(Batch, SpeaksInTheWordsOfTheTool) {
+    const auto images = writeImages(2);
+    records[recordNameOf(images[1])] = std::nullopt;
+    serveRecords();
+    const ProcessResult result = batch({"staple", "--jobs", "1"}, images);
+    EXPECT_THAT(result.outputLines(),
+                ElementsAre(images[0].path + ": The staple and validate action worked!",
+                            images[1].path + ": The staple and validate action failed! Error 65. (notIssued)",
+                            StartsWith("2 artefacts: 1 worked, 1 notIssued; ")));
+    EXPECT_THAT(result.errors, AllOf(StartsWith("pinwell-batch: tickets and copies are kept in "),
+                                     HasSubstr(directory / "tmp")));
+}
+
+TEST_F(Batch, AReportHoldsTheMembersOfItsSchemaInTheirOrder) {
+    const auto images = writeImages(1);
+    serveRecords();
+    const ProcessResult result = batch({"staple", "--json"}, images);
+    EXPECT_THAT(
+        result.outputLines().front(),
+        testing::MatchesRegex(
+            "\\{\"path\":\"[^\"]*\",\"operation\":\"staple\",\"kind\":\"diskImage\",\"recordName\":\"2/2/"
+            "[0-9a-f]{40}\",\"exitStatus\":0,\"cause\":\"worked\",\"attempts\":1,\"seconds\":[0-9.e-]+,"
+            "\"messages\":\\[\"Processing: [^\"]*\",\"Processing: [^\"]*\",\"The staple and validate action "
+            "worked!\"\\]\\}"));
+    EXPECT_THAT(result.outputLines().back(), StartsWith(R"({"summary":{"version":1,)"));
+    EXPECT_EQ(result.errors, "");
+}
+
+TEST_F(Batch, VerboseRunsTellAllThatTheToolTells) {
+    const auto images = writeImages(1);
+    serveRecords();
+    const ProcessResult result = batch({"staple", "-v"}, images);
+    EXPECT_THAT(result.outputLines(), AllOf(Contains(StartsWith("  JSON Data is ")),
+                                            Contains(StartsWith("  Downloaded ticket has been stored at ")),
+                                            Contains(EndsWith("The staple and validate action worked!"))));
+}
+
+TEST_F(Batch, QuietRunsSayNothing) {
+    const auto images = writeImages(1);
+    serveRecords();
+    const ProcessResult result = batch({"staple", "-q", directory / "missing"}, images);
+    EXPECT_EQ(result.exitStatus, 66);
+    EXPECT_EQ(result.output + result.errors, "");
+}
+
+TEST_F(Batch, AReaderThatHasGoneAwayStopsNothing) {
+    const auto images = writeImages(3);
+    serveRecords();
+    std::vector<std::string> arguments{"staple"};
+    for (const Artefact& image : images) arguments.push_back(image.path);
+    for (const Output output : {Output::brokenPipe, Output::closed}) {
+        Command made = batchCommand(arguments);
+        made.output = output;
+        const ProcessResult result = runProcess(made);
+        EXPECT_EQ(result.exitStatus, 0);
+        EXPECT_EQ(result.errors, "");
+    }
+    EXPECT_EQ(countStapled(images), 3U);
+}
+
+TEST_F(Batch, AnOutputThatIsFullIsAnError) {
+    const auto images = writeImages(1);
+    serveRecords();
+    Command made = batchCommand({"staple", images[0].path});
+    made.output = Output::full;
+    EXPECT_EQ(runProcess(made).exitStatus, 74);
+    EXPECT_EQ(countStapled(images), 1U);
+}
+
+// Lists.
+
+TEST_F(Batch, ReadsItsListFromAFile) {
+    const auto images = writeImages(3);
+    serveRecords();
+    const std::string file = list(joined(pathsOf(images), '\n'));
+    EXPECT_THAT(reportsOf(batch({"staple", "--json", "--from", file})),
+                AllOf(SizeIs(3), Each(Reports("worked", 0))));
+}
+
+TEST_F(Batch, TheLastLineOfAListNeedsNoEndAndEmptyOnesAreNone) {
+    const auto images = writeImages(2);
+    serveRecords();
+    const std::string file = list("\n\n" + images[0].path + "\n\n" + images[1].path);
+    EXPECT_THAT(reportsOf(batch({"staple", "--json", "--from", file})),
+                AllOf(SizeIs(2), Each(Reports("worked", 0))));
+}
+
+TEST_F(Batch, PathsOfTheLineComeBeforeThoseOfTheList) {
+    const auto images = writeImages(2);
+    serveRecords();
+    const ProcessResult result =
+        batch({"staple", "--jobs", "1", "--from", list(images[1].path), images[0].path});
+    EXPECT_THAT(result.outputLines(),
+                ElementsAre(StartsWith(images[0].path), StartsWith(images[1].path), testing::_));
+}
+
+TEST_F(Batch, ZeroBytesEndPathsThatHoldNewlines) {
+    const Artefact image =
+        writeArtefact(unsignedImage(foundation::toData("odd")), directory / "builds/many/odd\nname.dmg");
+    records[recordNameOf(image)] = ticketOf(image);
+    serveRecords();
+    const ProcessResult result = batch({"staple", "-0", "--from", list(image.path + std::string(1, '\0'))});
+    EXPECT_EQ(result.exitStatus, 0) << result.output << result.errors;
+    EXPECT_THAT(result.outputLines().front(), HasSubstr("odd\\nname.dmg"));
+}
+
+TEST_F(Batch, AFileThatIsNamedTwiceIsDoneOnce) {
+    const auto images = writeImages(1);
+    std::filesystem::create_directory_symlink(directory / "builds/many", directory / "builds/link");
+    serveRecords();
+    const ProcessResult result = batch({"staple", "--json", images[0].path, images[0].path, "many/Image0.dmg",
+                                        "./many//Image0.dmg", "many/../many/Image0.dmg", "link/Image0.dmg"});
+    EXPECT_THAT(reportsOf(result), ElementsAre(Reports("worked", 0)));
+    EXPECT_EQ(summaryOf(result)["duplicates"].unsignedIntegerValue(), 5U);
+}
+
+TEST_F(Batch, TwoNamesOfOneFileAreDoneOnce) {
+    const auto images = writeImages(1);
+    std::filesystem::create_hard_link(images[0].path, directory / "builds/many/Other.dmg");
+    serveRecords();
+    const ProcessResult result =
+        batch({"staple", "--json", images[0].path, directory / "builds/many/Other.dmg"});
+    EXPECT_THAT(reportsOf(result), ElementsAre(Reports("worked", 0)));
+}
+
+TEST_F(Batch, ShardsAreDisjointAndTogetherTheWholeList) {
+    const auto images = writeImages(40);
+    serveRecords();
+    std::set<std::string> seen;
+    std::size_t total = 0;
+    for (const char* shard : {"1/3", "2/3", "3/3"}) {
+        const auto reports = reportsOf(batch({"staple", "--json", "--shard", shard}, images));
+        EXPECT_THAT(reports, AllOf(Not(IsEmpty()), SizeIs(Lt(40U))));
+        total += reports.size();
+        for (const Value& report : reports) seen.insert(*report["path"].string());
+    }
+    EXPECT_EQ(total, 40U);
+    EXPECT_THAT(seen, SizeIs(40));
+}
+
+TEST_F(Batch, APartWithoutAPathIsNoError) {
+    const auto images = writeImages(1);
+    serveRecords();
+    std::size_t reports = 0;
+    for (const char* shard : {"1/2", "2/2"}) {
+        const ProcessResult result = batch({"staple", "--json", "--shard", shard}, images);
+        EXPECT_EQ(result.exitStatus, 0);
+        reports += reportsOf(result).size();
+    }
+    EXPECT_EQ(reports, 1U);
+}
+
+// Usage.
+
+TEST_F(Batch, WrongUsageEndsWith64AndOneLine) {
+    const std::string empty = list("\n\n");
+    for (const std::vector<std::string>& arguments : {std::vector<std::string>{},
+                                                      {"stapel", "x"},
+                                                      {"--json", "staple", "x"},
+                                                      {"staple"},
+                                                      {"staple", "--from", empty},
+                                                      {"staple", "--from", "/dev/null"},
+                                                      {"staple", "--jbos", "2", "x"},
+                                                      {"staple", "--jobs", "0", "x"},
+                                                      {"staple", "--jobs", "-1", "x"},
+                                                      {"staple", "--jobs", "two", "x"},
+                                                      {"staple", "--jobs"},
+                                                      {"staple", "--retries", "1.5", "x"},
+                                                      {"staple", "--retry-delay", "-1", "x"},
+                                                      {"staple", "--retry-delay", "nan", "x"},
+                                                      {"staple", "--timeout", "", "x"},
+                                                      {"staple", "--shard", "3/2", "x"},
+                                                      {"staple", "--shard", "0/2", "x"},
+                                                      {"staple", "--shard", "1", "x"},
+                                                      {"staple", "--color", "sometimes", "x"},
+                                                      {"staple", "--json=1", "x"},
+                                                      {"staple", "-Z", "x"}}) {
+        const ProcessResult result = batch(arguments);
+        EXPECT_EQ(result.exitStatus, 64) << testing::PrintToString(arguments);
+        EXPECT_EQ(result.output, "");
+        EXPECT_THAT(linesOf(result.errors), ElementsAre(StartsWith("pinwell-batch: ")))
+            << testing::PrintToString(arguments);
+    }
+}
+
+TEST_F(Batch, NamesTheNearestThatExists) {
+    EXPECT_THAT(batch({"stapel", "x"}).errors, HasSubstr("did you mean staple?"));
+    EXPECT_THAT(batch({"valdate", "x"}).errors, HasSubstr("did you mean validate?"));
+    EXPECT_THAT(batch({"staple", "--jbos", "2", "x"}).errors, HasSubstr("did you mean --jobs?"));
+    EXPECT_THAT(batch({"staple", "--retry-dealy=2", "x"}).errors, HasSubstr("did you mean --retry-delay?"));
+    EXPECT_THAT(batch({"staple", "--nonsense", "x"}).errors, Not(HasSubstr("did you mean")));
+}
+
+TEST_F(Batch, HelpAndVersionGoToStandardOutput) {
+    EXPECT_THAT(batch({"--help"}), Ended(0, Contains(HasSubstr("pinwell-batch validate"))));
+    EXPECT_THAT(batch({"staple", "--help"}), Ended(0, Contains(HasSubstr("--retry-delay SECONDS"))));
+    EXPECT_THAT(batch({"--version"}), Ended(0, ElementsAre("pinwell-batch 34.0")));
+    EXPECT_THAT(batch({"validate", "--version"}), Ended(0, ElementsAre("pinwell-batch 34.0")));
+}
+
+TEST_F(Batch, WhatComesAfterTwoDashesIsAPath) {
+    writeArtefact(unsignedImage(foundation::toData("dashed")), directory / "builds/--help.dmg");
+    const Artefact image = unsignedImage(foundation::toData("dashed"));
+    records[recordNameOf(image)] = ticketOf(image);
+    serveRecords();
+    EXPECT_EQ(batch({"staple", "--", "--help.dmg"}).exitStatus, 0);
+    EXPECT_EQ(batch({"staple", "--json", "--", "-q"}).exitStatus, 66);
+}
+
+TEST_F(Batch, AListThatCannotBeReadIsNamed) {
+    const ProcessResult missing = batch({"staple", "--from", directory / "nowhere"});
+    EXPECT_EQ(missing.exitStatus, 66);
+    EXPECT_THAT(missing.errors, HasSubstr("nowhere"));
+    const ProcessResult folder = batch({"staple", "--from", directory / "builds"});
+    EXPECT_EQ(folder.exitStatus, 66);
+}
+
+TEST_F(Batch, ColorsOnlyWhereItIsWanted) {
+    const auto images = writeImages(1);
+    serveRecords();
+    EXPECT_THAT(batch({"staple", images[0].path}).output, Not(HasSubstr("\x1b")));
+    EXPECT_THAT(batch({"staple", "--color", "always", images[0].path}).output, HasSubstr("\x1b["));
+    environment["CLICOLOR_FORCE"] = "1";
+    EXPECT_THAT(batch({"staple", images[0].path}).output, HasSubstr("\x1b["));
+    EXPECT_THAT(batch({"staple", "--color=never", images[0].path}).output, Not(HasSubstr("\x1b")));
+    environment["NO_COLOR"] = "1";
+    EXPECT_THAT(batch({"staple", images[0].path}).output, Not(HasSubstr("\x1b")));
+    EXPECT_THAT(batch({"staple", "--json", "--color", "always", images[0].path}).output,
+                Not(HasSubstr("\x1b")));
+}
+
+// The temporary directory.
+
+TEST_F(Batch, LeavesNothingInTheTemporaryDirectoryWhenAllWentWell) {
+    const auto images = writeImages(3);
+    serveRecords();
+    EXPECT_EQ(batch({"staple"}, images).exitStatus, 0);
+    EXPECT_THAT(temporaryFiles(), IsEmpty());
+}
+
+TEST_F(Batch, KeepsTicketsAndCopiesWhenAskedToOrWhenSomethingWentWrong) {
+    const auto images = writeImages(2);
+    serveRecords();
+    EXPECT_EQ(batch({"staple", "--keep"}, images).exitStatus, 0);
+    EXPECT_THAT(temporaryFiles(),
+                AllOf(SizeIs(5), Contains(EndsWith(".ticket")), Contains(EndsWith(".dmgData"))));
+    std::filesystem::remove_all(directory / "tmp");
+    std::filesystem::create_directory(directory / "tmp");
+    EXPECT_EQ(batch({"staple", directory / "missing"}, images).exitStatus, 66);
+    EXPECT_THAT(temporaryFiles(), SizeIs(5));
+}
+
+TEST_F(Batch, ATemporaryDirectoryThatIsNotThereIsSaid) {
+    environment["TMPDIR"] = directory / "nowhere";
+    const ProcessResult result = batch({"staple", bundle});
+    EXPECT_EQ(result.exitStatus, 73);
+    EXPECT_THAT(linesOf(result.errors), ElementsAre(StartsWith("pinwell-batch: no temporary directory")));
+}
+
+// JUnit.
+
+TEST_F(Batch, WritesAJUnitReport) {
+    const auto images = writeImages(3);
+    records[recordNameOf(images[1])] = std::nullopt;
+    serveRecords();
+    const std::string report = directory / "builds/report.xml";
+    EXPECT_EQ(batch({"staple", "-q", "--junit", report}, images).exitStatus, 65);
+    const std::string text = readFile(report);
+    EXPECT_THAT(text, AllOf(HasSubstr("tests=\"3\" failures=\"1\" errors=\"0\""),
+                            HasSubstr("<failure type=\"notIssued\""), HasSubstr("Record not found")));
+    EXPECT_THAT(namesBelow(directory / "builds"), Contains("report.xml").Times(1));
+    const ProcessResult parsed = runProcess(
+        {.executable = "/usr/bin/python3",
+         .arguments = {
+             "-c", "import sys, xml.etree.ElementTree as t; print(len(t.parse(sys.argv[1]).getroot()[0]))",
+             report}});
+    EXPECT_EQ(parsed.output, "3\n") << parsed.errors;
+}
+
+}  // namespace
+}  // namespace pinwell::test
