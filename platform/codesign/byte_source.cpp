@@ -11,18 +11,27 @@
 
 namespace pinwell::codesign {
 
-namespace {
-
-Status statusForOpen(int number) {
-    switch (number) {
+Status statusOfLookup(std::int64_t reason) {
+    switch (reason) {
         case ENOENT:
         case ENOTDIR:
         case ELOOP:  // O_NOFOLLOW met a link
+        case EXDEV:  // a link that leads out of the bundle
         case ENXIO:  // a socket, or a pipe nobody writes to
             return kStaticCodeNotFound;
         default:
             return kIOError;
     }
+}
+
+namespace {
+
+foundation::FileDescriptor openToRead(const foundation::Places& places, const std::string& path) {
+    const auto place = places.find(path);
+    if (!place) throw CodeError(statusOfLookup(place.error().code()), "cannot open the file");
+    auto file = place->open(O_RDONLY | O_NONBLOCK | O_NOCTTY);
+    if (!file) throw CodeError(statusOfLookup(file.error().code()), "cannot open the file");
+    return *std::move(file);
 }
 
 }  // namespace
@@ -47,9 +56,8 @@ void ByteSource::readAll(std::uint64_t offset, std::span<std::byte> buffer) cons
     if (readAt(offset, buffer) != buffer.size()) throw CodeError(kIOError, "the file became shorter");
 }
 
-FileSource::FileSource(const std::string& path)
-    : file_(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC | O_NOCTTY)) {
-    if (!file_) throw CodeError(statusForOpen(errno), "cannot open the file");
+FileSource::FileSource(const foundation::Places& places, const std::string& path)
+    : file_(openToRead(places, path)) {
     struct stat status = {};
     if (fstat(file_.get(), &status) != 0) throw CodeError(kIOError, "cannot examine the file");
     if (!S_ISREG(status.st_mode)) throw CodeError(kStaticCodeNotFound, "not a regular file");

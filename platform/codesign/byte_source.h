@@ -6,13 +6,18 @@
 #include <span>
 #include <string>
 
+#include "codesign/code_signing.h"
 #include "foundation/bytes.h"
 #include "foundation/file_io.h"
+#include "foundation/places.h"
 
 namespace pinwell::codesign {
 
 using foundation::ByteView;
 using foundation::Data;
+
+/// What the service says of a file that cannot be looked up or opened, by the errno value.
+Status statusOfLookup(std::int64_t reason);
 
 /// Bytes with a size that was fixed when the source was made. A file may change afterwards; a read that no
 /// longer finds its bytes then fails, and nothing else happens.
@@ -47,7 +52,7 @@ class FileSource final : public ByteSource {
   public:
     /// Never follows a link in the last component and never blocks on a pipe or device. Throws CodeError:
     /// kStaticCodeNotFound when no regular file is there, kIOError when it cannot be opened.
-    explicit FileSource(const std::string& path);
+    FileSource(const foundation::Places& places, const std::string& path);
 
     std::uint64_t size() const override { return size_; }
 

@@ -143,7 +143,7 @@ void describeWhole(const FileCode& code, CodeDescription& into) {
         [&] {
             if (code.kind() == CodeKind::diskImage) describeSlice(code, code.diskImageSignature(), shown);
             if (code.kind() != CodeKind::separatelySigned) return;
-            if (const auto components = componentsOfSeparateFiles(code.signatureDirectory()))
+            if (const auto components = code.separateComponents())
                 shown.signature = describeSeparateFiles(*components);
         },
         [&](Status, const char* reason) { shown.problem = reason; });
@@ -161,11 +161,11 @@ SignatureDescription describeSignature(ByteView area) {
     return describeSuperBlob(area, [](SignatureComponents components) { return components; });
 }
 
-CodeDescription describeCode(const std::string& path, const MainExecutableFinder& finder) {
+CodeDescription describeCode(const std::string& path, const CodeAccess& access) {
     CodeDescription description;
     guarded(
         [&] {
-            const std::shared_ptr<FileCode> code = FileCode::atPath(path, finder);
+            const std::shared_ptr<FileCode> code = FileCode::atPath(path, access);
             description.kind = code->kind();
             description.inBundle = code->inBundle();
             description.file = code->file();

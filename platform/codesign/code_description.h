@@ -81,7 +81,7 @@ inline constexpr std::size_t kMaximumBlobsDescribed = 1024;
 /// The signature in the bytes of a superblob, or of the area set aside for one.
 SignatureDescription describeSignature(ByteView area);
 
-CodeDescription describeCode(const std::string& path, const MainExecutableFinder& finder);
+CodeDescription describeCode(const std::string& path, const CodeAccess& access);
 
 /// With bundles as the service of makeCodeSigningService() sees them.
 CodeDescription describeCode(const std::string& path);

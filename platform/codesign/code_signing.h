@@ -12,6 +12,7 @@
 
 #include "foundation/bytes.h"
 #include "foundation/date.h"
+#include "foundation/places.h"
 #include "foundation/url.h"
 
 namespace pinwell::codesign {
@@ -135,7 +136,9 @@ class CodeSigningService {
     virtual Status copyAllCodeHashes(const URL& path, std::vector<SigningInformation>& all) = 0;
 };
 
-/// The service over files of this machine.
-std::unique_ptr<CodeSigningService> makeCodeSigningService();
+/// The service over files of this machine. Files are found through `places`: what is held there is reached
+/// from its one descriptor.
+std::unique_ptr<CodeSigningService> makeCodeSigningService(
+    std::shared_ptr<foundation::Places> places = std::make_shared<foundation::Places>());
 
 }  // namespace pinwell::codesign

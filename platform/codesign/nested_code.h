@@ -17,10 +17,10 @@ inline constexpr std::size_t kMaximumBundleEntries = 1'000'000;
 /// The valid signatures of all code below the directory `bundlePath`, its own main executable included
 /// wherever it is an executable image. Executable images are known by their first bytes, wherever they lie; a
 /// nested bundle in the separate form by its Contents/_CodeSignature/CodeDirectory. Files are visited in byte
-/// order of their names. Links are not followed; code that cannot be read, is not signed or is not valid is
+/// order of their names. Links are not followed, and nothing outside the directory is
+/// reached by what is moved about meanwhile; code that cannot be read, is not signed or is not valid is
 /// passed over. Throws CodeError (kUnimplemented) for a bundle beyond the limits: part of a list would pass
 /// for all of it.
-std::vector<CodeSignature> findNestedSignatures(const std::string& bundlePath,
-                                                const MainExecutableFinder& finder);
+std::vector<CodeSignature> findNestedSignatures(const std::string& bundlePath, const CodeAccess& access);
 
 }  // namespace pinwell::codesign

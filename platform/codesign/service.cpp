@@ -40,9 +40,9 @@ FileCode& fileCode(StaticCode& code) {
     return *own;
 }
 
-std::shared_ptr<FileCode> codeAt(const URL& url, const MainExecutableFinder& finder) {
+std::shared_ptr<FileCode> codeAt(const URL& url, const CodeAccess& access) {
     if (!url.isFileURL() || url.path().empty()) throw CodeError(kParameterError, "not a file URL");
-    return FileCode::atPath(url.path(), finder);
+    return FileCode::atPath(url.path(), access);
 }
 
 }  // namespace
@@ -51,7 +51,7 @@ Status FileCodeSigningService::createStaticCode(const URL& path, std::uint32_t f
                                                 std::shared_ptr<StaticCode>& code) {
     return asStatus([&] {
         if (flags != 0) return kParameterError;
-        code = codeAt(path, finder_);
+        code = codeAt(path, access_);
         return kSuccess;
     });
 }
@@ -111,11 +111,11 @@ Status FileCodeSigningService::setDetachedSignature(StaticCode& code, const Data
 
 Status FileCodeSigningService::copyAllCodeHashes(const URL& path, std::vector<SigningInformation>& all) {
     return asStatus([&] {
-        const std::shared_ptr<FileCode> code = codeAt(path, finder_);
+        const std::shared_ptr<FileCode> code = codeAt(path, access_);
         std::vector<CodeSignature> signatures = code->allSignatures();
         for (const CodeSignature& signature : signatures) signature.requireValid();
         if (code->inBundle()) {
-            std::vector<CodeSignature> nested = findNestedSignatures(path.path(), finder_);
+            std::vector<CodeSignature> nested = findNestedSignatures(path.path(), access_);
             std::move(nested.begin(), nested.end(), std::back_inserter(signatures));
         }
         // The walk has met the main executable again, and one library may lie in many places.

@@ -7,7 +7,7 @@ namespace pinwell::codesign {
 
 class FileCodeSigningService final : public CodeSigningService {
   public:
-    explicit FileCodeSigningService(MainExecutableFinder finder) : finder_(std::move(finder)) {}
+    explicit FileCodeSigningService(CodeAccess access) : access_(std::move(access)) {}
 
     Status createStaticCode(const URL& path, std::uint32_t flags, std::shared_ptr<StaticCode>& code) override;
     Status checkValidity(StaticCode& code, std::uint32_t flags) override;
@@ -20,7 +20,7 @@ class FileCodeSigningService final : public CodeSigningService {
     Status copyAllCodeHashes(const URL& path, std::vector<SigningInformation>& all) override;
 
   private:
-    MainExecutableFinder finder_;
+    CodeAccess access_;
 };
 
 }  // namespace pinwell::codesign

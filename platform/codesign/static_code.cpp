@@ -1,9 +1,5 @@
 #include "codesign/static_code.h"
 
-#include <sys/stat.h>
-
-#include <cerrno>
-
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
 #include "codesign/superblob.h"
@@ -12,17 +8,10 @@ namespace pinwell::codesign {
 
 namespace {
 
-bool isDirectory(const std::string& path) {
-    struct stat status = {};
-    if (lstat(path.c_str(), &status) == 0) return S_ISDIR(status.st_mode);
-    const bool nothingThere = errno == ENOENT || errno == ENOTDIR || errno == ELOOP;
-    throw CodeError(nothingThere ? kStaticCodeNotFound : kIOError, "cannot examine the path");
-}
-
 /// A whole file of the separate form; nothing when it is not there.
-std::optional<Data> readSignatureFile(const std::string& path) {
+std::optional<Data> readSignatureFile(const foundation::Places& places, const std::string& path) {
     try {
-        const FileSource file(path);
+        const FileSource file(places, path);
         if (file.size() > kMaximumSignatureFileLength) refuse("a signature file is too long");
         return file.read(0, static_cast<std::size_t>(file.size()));
     } catch (const CodeError& error) {
@@ -33,32 +22,38 @@ std::optional<Data> readSignatureFile(const std::string& path) {
 
 }  // namespace
 
-std::optional<SignatureComponents> componentsOfSeparateFiles(const std::string& directory) {
-    std::optional<Data> codeDirectory = readSignatureFile(directory + "/CodeDirectory");
+std::optional<SignatureComponents> componentsOfSeparateFiles(const foundation::Places& places,
+                                                             const std::string& directory) {
+    std::optional<Data> codeDirectory = readSignatureFile(places, directory + "/CodeDirectory");
     if (!codeDirectory) return std::nullopt;
     SignatureComponents components;
     components.blobs.emplace(kSlotCodeDirectory, std::move(*codeDirectory));
-    if (std::optional<Data> requirements = readSignatureFile(directory + "/CodeRequirements")) {
+    if (std::optional<Data> requirements = readSignatureFile(places, directory + "/CodeRequirements")) {
         components.blobs.emplace(kSlotRequirements, std::move(*requirements));
     }
-    components.cms = readSignatureFile(directory + "/CodeSignature").value_or(Data());
+    components.cms = readSignatureFile(places, directory + "/CodeSignature").value_or(Data());
     return components;
 }
 
 FileCode::FileCode(CodeKind kind, std::string file, std::unique_ptr<ByteSource> source,
-                   std::optional<DiskImageTrailer> trailer, std::string signatureDirectory)
+                   std::optional<DiskImageTrailer> trailer, std::string signatureDirectory,
+                   std::shared_ptr<foundation::Places> places, foundation::Anchor anchor)
     : kind_(kind),
       file_(std::move(file)),
       source_(std::move(source)),
       trailer_(std::move(trailer)),
-      signatureDirectory_(std::move(signatureDirectory)) {}
+      signatureDirectory_(std::move(signatureDirectory)),
+      places_(std::move(places)),
+      anchor_(std::move(anchor)) {}
 
-std::shared_ptr<FileCode> FileCode::atPath(const std::string& path, const MainExecutableFinder& finder) {
-    const bool bundle = isDirectory(path);
-    const std::optional<std::string> file = bundle ? finder(path) : path;
+std::shared_ptr<FileCode> FileCode::atPath(const std::string& path, const CodeAccess& access) {
+    foundation::Result<foundation::Anchor> anchor = access.places->hold(path);
+    if (!anchor) throw CodeError(statusOfLookup(anchor.error().code()), "cannot examine the path");
+    const bool bundle = (*anchor)->isTree();
+    const std::optional<std::string> file = bundle ? access.finder(*access.places, path) : path;
     if (!file) throw CodeError(kStaticCodeNotFound, "the directory has no main executable");
 
-    auto source = std::make_unique<FileSource>(*file);
+    auto source = std::make_unique<FileSource>(*access.places, *file);
     std::optional<DiskImageTrailer> trailer = DiskImageTrailer::read(*source);
     CodeKind kind = CodeKind::opaqueFile;
     if (trailer) {
@@ -71,8 +66,9 @@ std::shared_ptr<FileCode> FileCode::atPath(const std::string& path, const MainEx
         trailer.reset();
     }
     std::string signatureDirectory = bundle ? path + "/Contents/_CodeSignature" : std::string();
-    return std::shared_ptr<FileCode>(
-        new FileCode(kind, *file, std::move(source), std::move(trailer), std::move(signatureDirectory)));
+    return std::shared_ptr<FileCode>(new FileCode(kind, *file, std::move(source), std::move(trailer),
+                                                  std::move(signatureDirectory), access.places,
+                                                  *std::move(anchor)));
 }
 
 SignatureComponents FileCode::completed(SignatureComponents components) const {
@@ -98,7 +94,7 @@ std::optional<CodeSignature> FileCode::readSignature() const {
         case CodeKind::opaqueFile:
             return std::nullopt;
         case CodeKind::separatelySigned: {
-            std::optional<SignatureComponents> components = componentsOfSeparateFiles(signatureDirectory_);
+            std::optional<SignatureComponents> components = separateComponents();
             return components ? CodeSignature::parse(*std::move(components)) : std::nullopt;
         }
         case CodeKind::diskImage:

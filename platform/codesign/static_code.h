@@ -22,30 +22,45 @@
 #include "codesign/byte_source.h"
 #include "codesign/code_signature.h"
 #include "codesign/disk_image_trailer.h"
+#include "foundation/places.h"
 
 namespace pinwell::codesign {
 
 /// The path of the main executable of a directory opened as a bundle; nothing when it has none.
-using MainExecutableFinder = std::function<std::optional<std::string>(const std::string& bundlePath)>;
+using MainExecutableFinder =
+    std::function<std::optional<std::string>(foundation::Places&, const std::string& bundlePath)>;
+
+/// How code is found. Copies share the places.
+struct CodeAccess {
+    std::shared_ptr<foundation::Places> places;
+    MainExecutableFinder finder;
+};
 
 enum class CodeKind { executableImage, diskImage, opaqueFile, separatelySigned };
 
 /// The components of a signature in separate files, by the directory that they stand in; nothing when there
 /// is no code directory. Throws CodeError.
-std::optional<SignatureComponents> componentsOfSeparateFiles(const std::string& directory);
+std::optional<SignatureComponents> componentsOfSeparateFiles(const foundation::Places& places,
+                                                             const std::string& directory);
 
-/// The StaticCode of this service. Holds the file open, so that all answers are about one file even when its
-/// path gets another; keeps the signature once it was read.
+/// The StaticCode of this service. Holds the file and its bundle open, so that all answers are about one file
+/// even when its path gets another; keeps the signature once it was read. Nothing is reached through a link
+/// that leads out of the bundle.
 class FileCode final : public StaticCode {
   public:
     /// Throws CodeError: kStaticCodeNotFound when nothing there could be code, kIOError when it cannot be
     /// read.
-    static std::shared_ptr<FileCode> atPath(const std::string& path, const MainExecutableFinder& finder);
+    static std::shared_ptr<FileCode> atPath(const std::string& path, const CodeAccess& access);
 
     CodeKind kind() const noexcept { return kind_; }
     bool inBundle() const noexcept { return !signatureDirectory_.empty(); }
     const std::string& file() const noexcept { return file_; }
-    const std::string& signatureDirectory() const noexcept { return signatureDirectory_; }
+
+    /// The components of its signature in separate files, as componentsOfSeparateFiles().
+    std::optional<SignatureComponents> separateComponents() const {
+        return componentsOfSeparateFiles(*places_, signatureDirectory_);
+    }
+
     const ByteSource& source() const noexcept { return *source_; }
     const std::optional<DiskImageTrailer>& trailer() const noexcept { return trailer_; }
 
@@ -68,7 +83,8 @@ class FileCode final : public StaticCode {
 
   private:
     FileCode(CodeKind kind, std::string file, std::unique_ptr<ByteSource> source,
-             std::optional<DiskImageTrailer> trailer, std::string signatureDirectory);
+             std::optional<DiskImageTrailer> trailer, std::string signatureDirectory,
+             std::shared_ptr<foundation::Places> places, foundation::Anchor anchor);
 
     std::optional<CodeSignature> readSignature() const;
     std::optional<CodeSignature> signatureFrom(ByteView superblob) const;
@@ -78,6 +94,8 @@ class FileCode final : public StaticCode {
     std::unique_ptr<ByteSource> source_;
     std::optional<DiskImageTrailer> trailer_;
     std::string signatureDirectory_;  // of a bundle; empty for a plain file
+    std::shared_ptr<foundation::Places> places_;
+    foundation::Anchor anchor_;  // of the path that the code was asked for by
     std::optional<CodeSignature> signature_;
     bool signatureRead_ = false;
 };

@@ -1,10 +1,13 @@
 #include "foundation/bundle.h"
 
+#include <dirent.h>
+#include <fcntl.h>
 #include <sys/stat.h>
 
 #include <cerrno>
-#include <filesystem>
-#include <system_error>
+#include <initializer_list>
+#include <memory>
+#include <string_view>
 
 #include "foundation/file_io.h"
 #include "foundation/property_list.h"
@@ -14,16 +17,18 @@ namespace pinwell::foundation {
 namespace {
 
 constexpr std::string_view kExecutableKey = "CFBundleExecutable";
+constexpr std::string_view kContents = "Contents";
+constexpr std::string_view kCurrentVersion = "Versions/Current";
 
-bool isDirectory(const std::string& path) {
-    struct stat status {};
-    return ::stat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
+bool isDirectory(const HeldPlace& bundle, const std::string& relative) {
+    return bundle.open(relative, O_PATH | O_DIRECTORY).has_value();
 }
 
-// Of the thing itself: what a link in the bundle leads to is not part of it.
-bool isOwnEntry(const std::string& path, mode_t format) {
+// Of the entry itself: what a link in the bundle leads to is not part of it.
+std::optional<struct stat> statusOfEntry(int directory, const char* name, mode_t format) {
     struct stat status {};
-    return ::lstat(path.c_str(), &status) == 0 && (status.st_mode & S_IFMT) == format;
+    if (fstatat(directory, name, &status, AT_SYMLINK_NOFOLLOW) != 0) return std::nullopt;
+    return (status.st_mode & S_IFMT) == format ? std::optional(status) : std::nullopt;
 }
 
 bool isPlainName(std::string_view name) {
@@ -31,11 +36,27 @@ bool isPlainName(std::string_view name) {
            name.find('\0') == std::string_view::npos;
 }
 
+// What is reached only through a link that leads out (EXDEV) is not there either.
+bool isAbsent(const Error& error) {
+    return error.code() == ENOENT || error.code() == ENOTDIR || error.code() == EXDEV;
+}
+
+Result<Data> readListAt(const HeldPlace& bundle, const std::string& relative) {
+    // Looked at before it is opened for reading: opening alone can have an effect on a device.
+    const auto looked = bundle.open(relative, O_PATH);
+    if (!looked) return looked.error();
+    struct stat status {};
+    if (fstat(looked->get(), &status) != 0 || !S_ISREG(status.st_mode)) return Error::posix(EINVAL, relative);
+    const auto file = bundle.open(relative, O_RDONLY | O_NONBLOCK | O_NOCTTY);
+    if (!file) return file.error();
+    return readSmallFile(*file, relative, kMaximumPropertyListSize);
+}
+
 // The first of `candidates` that is there; an unreadable one hides those behind it.
-Value informationDictionary(std::initializer_list<std::string> candidates) {
-    for (const std::string& path : candidates) {
-        Result<Data> document = readSmallFile(path, kMaximumPropertyListSize);
-        if (!document && (document.error().code() == ENOENT || document.error().code() == ENOTDIR)) continue;
+Value informationDictionary(const HeldPlace& bundle, std::initializer_list<std::string> candidates) {
+    for (const std::string& relative : candidates) {
+        const Result<Data> document = readListAt(bundle, relative);
+        if (!document && isAbsent(document.error())) continue;
         if (!document) return {};
         Result<Value> list = parsePropertyList(*document);
         return list && list->dictionary() != nullptr ? *list : Value();
@@ -53,16 +74,12 @@ std::string executableName(const Value& information, const std::string& bundlePa
     return name;
 }
 
-std::optional<std::string> executableIn(const std::string& directory, const std::string& name) {
+std::optional<std::string> executableIn(const HeldPlace& bundle, const std::string& relative,
+                                        const std::string& name) {
     if (!isPlainName(name)) return std::nullopt;
-    const std::string path = directory + "/" + name;
-    if (!isOwnEntry(path, S_IFREG)) return std::nullopt;
-    return path;
-}
-
-bool hasExecuteBit(const std::string& path) {
-    struct stat status {};
-    return ::lstat(path.c_str(), &status) == 0 && (status.st_mode & (S_IXUSR | S_IXGRP | S_IXOTH)) != 0;
+    const auto directory = bundle.open(relative, O_PATH | O_DIRECTORY);
+    if (!directory || !statusOfEntry(directory->get(), name.c_str(), S_IFREG)) return std::nullopt;
+    return relative.empty() ? name : relative + "/" + name;
 }
 
 // Files of one class, of which one alone can be the executable. Keeps the first path and the number of all.
@@ -75,37 +92,70 @@ struct Candidates {
     }
 };
 
+struct DirectoryCloser {
+    void operator()(DIR* directory) const noexcept { closedir(directory); }
+};
+using DirectoryStream = std::unique_ptr<DIR, DirectoryCloser>;
+
+// Adds the file `name` of the sub-directory to its class of candidates.
+void addCandidate(int contents, const std::string& directory, const std::string& name, Candidates& executable,
+                  Candidates& other) {
+    if (!isPlainName(directory) || !statusOfEntry(contents, directory.c_str(), S_IFDIR)) return;
+    const FileDescriptor opened(
+        openat(contents, directory.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    if (!opened) return;
+    const auto file = statusOfEntry(opened.get(), name.c_str(), S_IFREG);
+    if (!file) return;
+    const bool mayExecute = (file->st_mode & (S_IXUSR | S_IXGRP | S_IXOTH)) != 0;
+    (mayExecute ? executable : other).add(directory + "/" + name);
+}
+
 // A directory that cannot be read to its end might hold a second candidate.
-std::optional<std::string> executableBelow(const std::string& contents, const std::string& name) {
+std::optional<std::string> executableBelow(const HeldPlace& bundle, const std::string& name) {
+    if (!isPlainName(name)) return std::nullopt;
+    auto contents = bundle.open(std::string(kContents), O_RDONLY | O_DIRECTORY);
+    if (!contents) return std::nullopt;
+    const DirectoryStream stream(fdopendir(contents->get()));
+    if (!stream) return std::nullopt;
+    const int directory = contents->release();  // the stream's now
+
     Candidates executable;
     Candidates other;
-    std::error_code failure;
-    std::filesystem::directory_iterator entry(contents, failure);
-    for (; !failure && entry != std::filesystem::directory_iterator(); entry.increment(failure)) {
-        if (!isOwnEntry(entry->path().native(), S_IFDIR)) continue;
-        auto found = executableIn(entry->path().native(), name);
-        if (!found) continue;
-        (hasExecuteBit(*found) ? executable : other).add(*std::move(found));
+    errno = 0;
+    while (const dirent* const entry = readdir(stream.get())) {
+        addCandidate(directory, &entry->d_name[0], name, executable, other);
+        errno = 0;
     }
     const Candidates& counted = executable.count > 0 ? executable : other;
-    if (failure || counted.count != 1) return std::nullopt;
-    return counted.first;
+    if (errno != 0 || counted.count != 1) return std::nullopt;
+    return std::string(kContents) + "/" + counted.first;
+}
+
+std::optional<std::string> mainExecutableBelow(const HeldPlace& bundle, const std::string& path) {
+    if (isDirectory(bundle, std::string(kCurrentVersion))) {
+        const std::string version(kCurrentVersion);
+        const Value information = informationDictionary(bundle, {version + "/Resources/Info.plist"});
+        return executableIn(bundle, version, executableName(information, path));
+    }
+    const Value information =
+        informationDictionary(bundle, {"Contents/Info.plist", "Resources/Info.plist", "Info.plist"});
+    const std::string name = executableName(information, path);
+    return isDirectory(bundle, std::string(kContents)) ? executableBelow(bundle, name)
+                                                       : executableIn(bundle, "", name);
 }
 
 }  // namespace
 
+std::optional<std::string> mainExecutableOfBundle(Places& places, const std::string& path) {
+    const auto bundle = places.hold(path);
+    if (!bundle || !(*bundle)->isTree()) return std::nullopt;
+    const auto found = mainExecutableBelow(**bundle, path);
+    return found ? std::optional(path + "/" + *found) : std::nullopt;
+}
+
 std::optional<std::string> mainExecutableOfBundle(const std::string& path) {
-    if (!isDirectory(path)) return std::nullopt;
-    const std::string version = path + "/Versions/Current";
-    if (isDirectory(version)) {
-        const Value information = informationDictionary({version + "/Resources/Info.plist"});
-        return executableIn(version, executableName(information, path));
-    }
-    const std::string contents = path + "/Contents";
-    const Value information = informationDictionary(
-        {contents + "/Info.plist", path + "/Resources/Info.plist", path + "/Info.plist"});
-    const std::string name = executableName(information, path);
-    return isDirectory(contents) ? executableBelow(contents, name) : executableIn(path, name);
+    Places places;
+    return mainExecutableOfBundle(places, path);
 }
 
 }  // namespace pinwell::foundation

@@ -4,6 +4,8 @@
 #include <optional>
 #include <string>
 
+#include "foundation/places.h"
+
 namespace pinwell::foundation {
 
 /// Path of the main executable of the directory at `path`, opened as a bundle; nothing when it has none.
@@ -15,6 +17,12 @@ namespace pinwell::foundation {
 /// another has one; if two are left, the bundle has none. Neither the executable nor that sub-directory may
 /// be a symbolic link. A directory with Versions/Current is a framework: property list in that version's
 /// Resources, executable in that version's root. A name that holds a slash or is "." or ".." names nothing.
+///
+/// What is reached only through a link that leads out of the bundle is not there. All is found from the
+/// descriptor that `places` holds of the directory; without one, it is held for the duration of the call.
+std::optional<std::string> mainExecutableOfBundle(Places& places, const std::string& path);
+
+/// The same with places of its own.
 std::optional<std::string> mainExecutableOfBundle(const std::string& path);
 
 }  // namespace pinwell::foundation

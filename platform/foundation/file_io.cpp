@@ -45,6 +45,11 @@ Result<Data> readSmallFile(const std::string& path, std::size_t limit) {
     if (const int reason = refusal(status)) return Error::posix(reason, path);
     const FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
     if (!file) return Error::posix(errno, path);
+    return readSmallFile(file, path, limit);
+}
+
+Result<Data> readSmallFile(const FileDescriptor& file, const std::string& path, std::size_t limit) {
+    struct stat status {};
     if (::fstat(file.get(), &status) != 0) return Error::posix(errno, path);
     if (const int reason = refusal(status)) return Error::posix(reason, path);
 

@@ -38,4 +38,7 @@ class FileDescriptor {
 /// names the path.
 Result<Data> readSmallFile(const std::string& path, std::size_t limit);
 
+/// The same of a file that is open, from its position on. Errors name it `path`.
+Result<Data> readSmallFile(const FileDescriptor& file, const std::string& path, std::size_t limit);
+
 }  // namespace pinwell::foundation

@@ -139,7 +139,7 @@ TEST(ReadAhead, ThrowsWhatReadingThrewAfterThePiecesBefore) {
 TEST(ReadAhead, OfAFileThatBecameShorterFails) {
     const TemporaryDirectory scratch;
     writeFile(scratch / "file", irregularBytes(3 * kReadAheadPieceSize));
-    const codesign::FileSource source(scratch / "file");
+    const codesign::FileSource source(foundation::Places{}, scratch / "file");
     std::filesystem::resize_file(scratch / "file", kReadAheadPieceSize + 1);
     ReadAhead pieces(source, source.size());
     EXPECT_EQ(pieces.next().size(), kReadAheadPieceSize);

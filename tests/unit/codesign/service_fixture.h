@@ -39,7 +39,7 @@ class CodeSigningTest : public ::testing::Test {
 
     /// Bundles as BundleBuilder writes them by default; finding executables in others is not this service's
     /// matter.
-    static std::optional<std::string> sampleExecutable(const std::string& bundle) {
+    static std::optional<std::string> sampleExecutable(foundation::Places&, const std::string& bundle) {
         return bundle + "/Contents/Programs/Sample";
     }
 
@@ -61,7 +61,8 @@ class CodeSigningTest : public ::testing::Test {
     }
 
     TemporaryDirectory scratch;
-    codesign::FileCodeSigningService service{sampleExecutable};
+    codesign::FileCodeSigningService service{
+        codesign::CodeAccess{std::make_shared<foundation::Places>(), sampleExecutable}};
 };
 
 }  // namespace pinwell::test

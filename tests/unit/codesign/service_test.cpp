@@ -84,7 +84,8 @@ TEST_F(StaticCodeOfAPath, IsNothingWhereNothingIs) {
 TEST_F(StaticCodeOfAPath, IsNothingInADirectoryWithoutMainExecutable) {
     std::filesystem::create_directory(scratch / "Sample.app");
     EXPECT_EQ(ask(scratch / "Sample.app").created, kStaticCodeNotFound);
-    codesign::FileCodeSigningService blind([](const std::string&) { return std::nullopt; });
+    codesign::FileCodeSigningService blind(
+        {std::make_shared<foundation::Places>(), [](auto&, const std::string&) { return std::nullopt; }});
     std::shared_ptr<codesign::StaticCode> code;
     EXPECT_EQ(blind.createStaticCode(scratch.url("Sample.app"), 0, code), kStaticCodeNotFound);
     EXPECT_EQ(code, nullptr);

@@ -195,6 +195,61 @@ TEST(Framework, WithALinkThatLeadsNowhereIsAFlatBundle) {
     EXPECT_EQ(bundle.mainExecutable(), bundle / "Kit");
 }
 
+// Another bundle beside the one under test, for links to lead to.
+class LinkedBundle : public SampleBundle {
+  public:
+    LinkedBundle() : SampleBundle("Sample.app") {
+        file("../Other.app/Contents/D/Sample").list("../Other.app/Contents/Info.plist", "tool");
+        file("../Other.app/Contents/D/tool").file("../Other.app/Versions/A/Sample");
+    }
+};
+
+TEST(LinkOutOfABundle, InPlaceOfContentsMakesItAFlatBundle) {
+    LinkedBundle bundle;
+    bundle.link("Contents", "../Other.app/Contents").file("Sample");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Sample");
+}
+
+TEST(LinkOutOfABundle, InPlaceOfContentsLeadsToNoExecutable) {
+    LinkedBundle relative;
+    EXPECT_EQ(relative.link("Contents", "../Other.app/Contents").mainExecutable(), std::nullopt);
+    LinkedBundle absolute;
+    EXPECT_EQ(absolute.link("Contents", absolute / "../Other.app/Contents").mainExecutable(), std::nullopt);
+}
+
+TEST(LinkOutOfABundle, InPlaceOfTheCurrentVersionMakesItNoFramework) {
+    LinkedBundle bundle;
+    bundle.link("Versions/Current", "../../Other.app/Versions/A").file("Sample");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Sample");
+}
+
+TEST(LinkOutOfABundle, InPlaceOfThePropertyListHidesIt) {
+    LinkedBundle bundle;
+    bundle.link("Contents/Info.plist", "../../Other.app/Contents/Info.plist");
+    bundle.file("Contents/D/tool").file("Contents/D/Sample");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/D/Sample");
+}
+
+TEST(LinkOutOfABundle, InPlaceOfThePropertyListLeavesTheNextOne) {
+    LinkedBundle bundle;
+    bundle.link("Contents/Info.plist", "../../Other.app/Contents/Info.plist").list("Info.plist", "second");
+    bundle.file("Contents/D/tool").file("Contents/D/second");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/D/second");
+}
+
+TEST(LinkOutOfABundle, InPlaceOfTheResourcesHidesThePropertyListInThem) {
+    LinkedBundle bundle;
+    bundle.link("Resources", "../Other.app/Contents").file("tool").file("Sample");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Sample");
+}
+
+TEST(LinkInABundle, ThatStaysInItIsFollowed) {
+    LinkedBundle bundle;
+    bundle.file("Real/D/tool").list("lists/Info.plist", "tool");
+    bundle.link("Real/Info.plist", "../lists/Info.plist").link("Contents", "Real");
+    EXPECT_EQ(bundle.mainExecutable(), bundle / "Contents/D/tool");
+}
+
 TEST(Bundle, IsADirectory) {
     SampleBundle bundle("Sample.app");
     bundle.file("file");

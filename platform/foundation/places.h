@@ -1,0 +1,99 @@
+// Where items are: a name in an open directory, instead of a path that leads somewhere else at every call.
+//
+//   const Anchor held = places.hold("/Applications/Tool.app");
+//   places.find("/Applications/Tool.app/Contents/CodeResources")
+//
+// While a directory is held, all paths below it are resolved from the descriptor that was opened first, and
+// nothing is reached through a link that leads out of it (openBeneath). While any other item is held, the
+// same is so for its own name and its siblings' in the directory that it stands in. Other paths are resolved
+// as the kernel does.
+#pragma once
+
+#include <sys/stat.h>
+
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "foundation/error.h"
+#include "foundation/file_io.h"
+
+namespace pinwell::foundation {
+
+/// One item, by its name in a directory that is held open. Copies share the directory.
+struct Place {
+    std::shared_ptr<const FileDescriptor> parent;  // opened with O_PATH
+    std::string name;                              // a single component; "." for a held directory itself
+    std::string path;                              // as the caller named it: errors speak of it
+
+    int directory() const noexcept { return parent->get(); }
+
+    /// Status of the item itself, a link not followed.
+    Result<struct stat> status() const;
+
+    /// The item itself, a link not followed (ELOOP); close-on-exec. `flags` as for open(2).
+    Result<FileDescriptor> open(int flags, mode_t mode = 0) const;
+
+    /// The directory that the item stands in, opened for reading.
+    Result<FileDescriptor> openParent() const;
+};
+
+/// A directory that is held open.
+class HeldPlace {
+  public:
+    /// `item` is what was asked for; `isTree` says that all below the directory is reached from it, and not
+    /// its own entries alone.
+    HeldPlace(std::string item, std::string directory, bool isTree, FileDescriptor descriptor)
+        : item_(std::move(item)),
+          directory_(std::move(directory)),
+          isTree_(isTree),
+          descriptor_(std::make_shared<FileDescriptor>(std::move(descriptor))) {}
+
+    const std::string& item() const noexcept { return item_; }
+    const std::string& directory() const noexcept { return directory_; }
+    bool isTree() const noexcept { return isTree_; }
+    const std::shared_ptr<const FileDescriptor>& descriptor() const noexcept { return descriptor_; }
+
+    /// The part of `path` below the directory, empty for the directory itself; `nullopt` if the path is not
+    /// resolved from here.
+    std::optional<std::string> relative(const std::string& path) const;
+
+    /// Opens what is at `relative`, links followed that stay below (openBeneath). Errors name the whole path.
+    Result<FileDescriptor> open(const std::string& relative, int flags) const;
+
+  private:
+    std::string item_;
+    std::string directory_;
+    bool isTree_;
+    std::shared_ptr<const FileDescriptor> descriptor_;
+};
+
+/// Holds an item's directory for as long as it, or a copy of it, lives.
+using Anchor = std::shared_ptr<const HeldPlace>;
+
+/// May be used from any thread.
+class Places {
+  public:
+    Places() = default;
+    Places(const Places&) = delete;
+    Places& operator=(const Places&) = delete;
+
+    /// Holds the item at `path`, which is absolute: a directory itself, of anything else the directory that
+    /// it stands in. A path that is held already keeps its descriptor, whatever the name leads to by now. An
+    /// error is the lookup's own.
+    Result<Anchor> hold(const std::string& path);
+
+    /// Errors with EXDEV for what is reached through a link that leads out of a held directory.
+    Result<Place> find(const std::string& path) const;
+
+  private:
+    std::vector<Anchor> held() const;
+
+    mutable std::mutex mutex_;
+    mutable std::vector<std::weak_ptr<const HeldPlace>> held_;
+};
+
+}  // namespace pinwell::foundation
