@@ -53,6 +53,9 @@ class DownloadDelegate : public https::SessionDelegate {
     const foundation::Value& largeTicketSize() const noexcept { return largeTicketSize_; }
     void setLargeTicketSize(foundation::Value size) { largeTicketSize_ = std::move(size); }
 
+    /// Keeps the artefact's lock, which may be null, until the process ends or the run is parked for good.
+    void keepLock(std::unique_ptr<files::ItemLock> lock) noexcept { lock_ = std::move(lock); }
+
     // Lookup.
 
     /// True when asynchronous work has started that will end the process; false when the caller ends it with
@@ -105,6 +108,8 @@ class DownloadDelegate : public https::SessionDelegate {
     std::shared_ptr<PWHashedFile> hashedFile_;
     std::optional<URL> tempFileURL_;
     foundation::Value largeTicketSize_;
+
+    std::unique_ptr<files::ItemLock> lock_;
 
     Platform platform_;
     std::shared_ptr<https::Session> lookupSession_;  // kept for the life of the process: never invalidated

@@ -54,6 +54,8 @@ void DownloadDelegate::didComplete(https::Session&, https::Task&, const std::opt
     MessageLog("Large ticket for %@ failed to download. %@", hashedFile_->fileURL()->path(),
                error->localizedFailureReason());
     hashedFile_->setAppropriateExitCode(kExitNoHost);
+    // The run is parked from here on, and nothing will be written: others need not wait for it.
+    lock_.reset();
 }
 
 }  // namespace pinwell

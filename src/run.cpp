@@ -9,7 +9,8 @@
 namespace pinwell {
 
 bool lockArtefact(const Platform& platform, const URL& path, std::unique_ptr<files::ItemLock>& lock) {
-    auto locked = platform.files.lockItem(path);
+    auto locked = platform.files.lockItem(
+        path, [&] { NoisyLog("Waiting for another process that keeps %@ locked.", path.path()); });
     if (locked) {
         lock = *std::move(locked);
         return true;
@@ -21,17 +22,17 @@ bool lockArtefact(const Platform& platform, const URL& path, std::unique_ptr<fil
 
 int runOperation(std::uint8_t operation, const URL& path, const Platform& platform,
                  const std::function<void()>& waitForEnd) {
-    // Held to the end: of two staples of one artefact, the second begins to read when the first has read back
-    // what it wrote.
+    // Taken before anything is read, and held to the end: of two staples of one artefact, the second begins
+    // to read when the first has read back what it wrote.
     std::unique_ptr<files::ItemLock> lock;
-    if (operation == kOperationStaple && !lockArtefact(platform, path, lock)) return kExitCannotCreate;
-
-    const auto hashedFile = PWHashedFile::initWithFileURL(path, platform);
+    const auto hashedFile = PWHashedFile::initWithFileURL(
+        path, platform, [&] { return operation != kOperationStaple || lockArtefact(platform, path, lock); });
     if (hashedFile == nullptr) return kExitNoInput;
     if (hashedFile->appropriateExitCode() != kExitOK) return hashedFile->appropriateExitCode();
 
     DownloadDelegate controller(hashedFile, platform);
     controller.setOperation(operation);
+    controller.keepLock(std::move(lock));
     if (controller.grabTicket()) {
         waitForEnd();
         return kExitOK;

@@ -4,8 +4,8 @@
 
 namespace pinwell::files {
 
-std::optional<URL> mainExecutableIn(const URL& directory) {
-    const auto path = foundation::mainExecutableOfBundle(directory.path());
+std::optional<URL> mainExecutableIn(foundation::Places& places, const URL& directory) {
+    const auto path = foundation::mainExecutableOfBundle(places, directory.path());
     if (!path) return std::nullopt;
     return URL::fileURLWithPath(*path);
 }

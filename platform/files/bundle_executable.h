@@ -7,6 +7,6 @@
 
 namespace pinwell::files {
 
-std::optional<URL> mainExecutableIn(const URL& directory);
+std::optional<URL> mainExecutableIn(foundation::Places& places, const URL& directory);
 
 }  // namespace pinwell::files

@@ -5,58 +5,111 @@
 #include <sys/ioctl.h>
 #include <unistd.h>
 
+#include <algorithm>
+
 namespace pinwell::files {
 namespace {
 
-// How much of the file is cloned to find out: enough to be a whole number of blocks on every file system,
-// little enough to be quick on a file of many extents.
-constexpr off_t kProbeLength = off_t{1024} * 1024;
+// One block of every file system in use, and of no file system more than it can look at.
+constexpr std::uint64_t kRange = 4096;
 
-// A file that has no name, or loses it at once: whatever happens then, nothing is left.
-Result<OpenFile> createNamelessFile(const std::string& directory) {
-    FileDescriptor descriptor(uninterrupted(
-        [&] { return open(directory.c_str(), O_TMPFILE | O_RDWR | O_CLOEXEC, S_IRUSR | S_IWUSR); }));
-    if (descriptor) return OpenFile{std::move(descriptor), directory, {}};
-    // What a file system without O_TMPFILE answers (EISDIR where even the kernel has not heard of it).
-    if (errno != EOPNOTSUPP && errno != EISDIR && errno != EINVAL) return lastError(directory);
-
-    auto file = createTemporaryFile(directory);
-    if (!file) return file;
-    if (unlink(file->path.c_str()) != 0) return lastError(file->path);
-    return file;
-}
-
-// Whether the errno says "not this file, here", rather than that something went wrong.
+// Refused for lack of the feature, before the arguments are looked at.
 bool meansNo(int reason) {
     switch (reason) {
         case EOPNOTSUPP:
         case ENOTTY:
         case ENOSYS:
         case EXDEV:
-        case EINVAL:
-        case EPERM:  // not allowed by a sandbox, or the file is sealed against it
-        case ETXTBSY:
-            return true;  // a swap file
+            return true;
         default:
             return false;
     }
 }
 
-}  // namespace
+// What a file system that has the feature says to two ranges that overlap, or to a file without a block.
+bool meansYes(int reason) {
+    return reason == EINVAL;
+}
 
-Result<bool> fileSupportsCloning(const std::string& path) {
-    const auto file = openRegularFile(path, O_RDONLY);
+enum class Answer { yes, no, unknown };
+
+// file_dedupe_range of linux/fs.h with its one destination, which the kernel's header leaves open.
+struct SharingQuestion {
+    std::uint64_t offset;
+    std::uint64_t length;
+    std::uint16_t destinationCount;
+    std::uint16_t reserved1;
+    std::uint32_t reserved2;
+    std::int64_t destination;
+    std::uint64_t destinationOffset;
+    std::uint64_t shared;
+    std::int32_t status;
+    std::uint32_t reserved3;
+};
+static_assert(sizeof(SharingQuestion) == sizeof(file_dedupe_range) + sizeof(file_dedupe_range_info));
+
+// ioctl_fideduperange(2) of the file's beginning with itself. A file that is open for reading will do.
+Answer askForSharing(const OpenFile& file) {
+    // The kernel looks no further at an empty range, or at one that reaches past the end.
+    if (file.status.st_size == 0) return Answer::unknown;
+    SharingQuestion question{};
+    question.length = std::min(kRange, static_cast<std::uint64_t>(file.status.st_size));
+    question.destinationCount = 1;
+    question.destination = file.number();
+    // No operation of that sort at all, in the file system's table of them.
+    if (uninterrupted([&] { return ioctl(file.number(), FIDEDUPERANGE, &question); }) != 0)
+        return meansNo(errno) || errno == EINVAL ? Answer::no : Answer::unknown;
+    const int status = question.status;
+    if (status >= 0 || meansYes(-status)) return Answer::yes;
+    // EOPNOTSUPP is also the answer where files can be cloned but not compared first (NFS, CIFS); EPERM,
+    // where the file is somebody else's.
+    return Answer::unknown;
+}
+
+// ioctl_ficlonerange(2) of the file's beginning into itself. The file must be open for writing.
+Result<bool> askForCloning(const Place& place) {
+    const auto file = openRegularFile(place, O_RDWR);
     if (!file) return file.error();
-    const auto probe = createNamelessFile(directoryOf(path));
-    if (!probe) return probe.error();
-
     file_clone_range range{};
     range.src_fd = file->number();
-    // 0 is "to the end", which alone need not be a whole number of blocks.
-    range.src_length = file->status.st_size > kProbeLength ? static_cast<std::uint64_t>(kProbeLength) : 0;
-    if (uninterrupted([&] { return ioctl(probe->number(), FICLONERANGE, &range); }) == 0) return true;
+    range.src_length = kRange;
+    if (uninterrupted([&] { return ioctl(file->number(), FICLONERANGE, &range); }) == 0) return true;
+    if (meansYes(errno)) return true;
     if (meansNo(errno)) return false;
-    return lastError(path);
+    return lastError(place.path);
+}
+
+// A clone of the file's beginning into a file without a name, in the same directory. What is left when the
+// file may only be read, and somebody else's: its directory says then whether it can be replaced.
+Result<bool> tryCloning(const OpenFile& file) {
+    const Place& place = file.place;
+    const FileDescriptor probe(uninterrupted(
+        [&] { return openat(place.directory(), ".", O_TMPFILE | O_RDWR | O_CLOEXEC, S_IRUSR | S_IWUSR); }));
+    if (!probe) return lastError(directoryOf(place.path));
+    file_clone_range range{};
+    range.src_fd = file.number();
+    range.src_length = file.status.st_size > static_cast<off_t>(kRange) ? kRange : 0;  // 0: to the end
+    if (uninterrupted([&] { return ioctl(probe.get(), FICLONERANGE, &range); }) == 0) return true;
+    if (meansNo(errno) || meansYes(errno)) return false;
+    return lastError(place.path);
+}
+
+}  // namespace
+
+Result<bool> fileSupportsCloning(const Place& place) {
+    const auto file = openRegularFile(place, O_RDONLY);
+    if (!file) return file.error();
+    switch (askForSharing(*file)) {
+        case Answer::yes:
+            return true;
+        case Answer::no:
+            return false;
+        case Answer::unknown:
+            break;
+    }
+    auto answer = askForCloning(place);
+    if (!answer && answer.error().code() == EACCES) return tryCloning(*file);
+    return answer;
 }
 
 bool cloneFile(const OpenFile& from, const OpenFile& to) {

@@ -6,9 +6,10 @@
 
 namespace pinwell::files {
 
-/// Whether the file system can clone the file at `path`, found by cloning the beginning of it into a file
-/// without a name, beside it. The file is only read.
-Result<bool> fileSupportsCloning(const std::string& path);
+/// Whether the file system can clone the file at `place`, found by asking for something that it can only
+/// refuse: to share the file's own beginning with itself. Nothing is changed, and as a rule nothing is made.
+/// An error is a question that could not be put.
+Result<bool> fileSupportsCloning(const Place& place);
 
 /// Makes the empty file `to` a clone of `from`. NO, with nothing lost but the attempt, when that cannot be.
 bool cloneFile(const OpenFile& from, const OpenFile& to);

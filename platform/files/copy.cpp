@@ -38,7 +38,7 @@ Result<void> writeAt(const OpenFile& to, ByteView bytes, off_t at) {
     while (!bytes.empty()) {
         const ssize_t count =
             uninterrupted([&] { return pwrite(to.number(), bytes.data(), bytes.size(), at); });
-        if (count < 0) return lastError(to.path);
+        if (count < 0) return lastError(to.path());
         bytes = bytes.subspan(static_cast<std::size_t>(count));
         at += count;
     }
@@ -50,9 +50,9 @@ Result<void> copyByHand(const OpenFile& from, const OpenFile& to, Extent extent)
     for (off_t at = extent.begin; at < extent.end;) {
         const std::size_t length = std::min(static_cast<std::size_t>(extent.end - at), piece.size());
         const ssize_t count = uninterrupted([&] { return pread(from.number(), piece.data(), length, at); });
-        if (count < 0) return lastError(from.path);
+        if (count < 0) return lastError(from.path());
         // The file has been cut short since it was opened; what was copied so far is not its contents.
-        if (count == 0) return Error::posix(EIO, from.path);
+        if (count == 0) return Error::posix(EIO, from.path());
         const auto bytes = ByteView(piece).first(static_cast<std::size_t>(count));
         if (auto done = writeAt(to, bytes, at); !done) return done;
         at += count;
@@ -67,10 +67,10 @@ Result<Extent> nextExtent(const OpenFile& from, off_t at, off_t size) {
         if (errno == ENXIO) return Extent{size, size};
         if (errno == EINVAL || errno == EOPNOTSUPP)
             return Extent{at, size};  // this file system knows no holes
-        return lastError(from.path);
+        return lastError(from.path());
     }
     const off_t end = uninterrupted([&] { return lseek(from.number(), begin, SEEK_HOLE); });
-    if (end < 0) return lastError(from.path);
+    if (end < 0) return lastError(from.path());
     return Extent{std::min(begin, size), std::min(end, size)};
 }
 
@@ -85,13 +85,13 @@ Result<void> copyContents(const OpenFile& from, const OpenFile& to) {
         if (auto done = copyByHand(from, to, {reached, extent->end}); !done) return done;
         at = extent->end;
     }
-    if (uninterrupted([&] { return ftruncate(to.number(), size); }) != 0) return lastError(to.path);
+    if (uninterrupted([&] { return ftruncate(to.number(), size); }) != 0) return lastError(to.path());
     return {};
 }
 
 }  // namespace
 
-Result<void> copyFile(const std::string& source, const std::string& destination) {
+Result<void> copyFile(const Place& source, const Place& destination) {
     const auto from = openRegularFile(source, O_RDONLY);
     if (!from) return from.error();
     auto to = createFile(destination);
@@ -106,7 +106,7 @@ Result<void> copyFile(const std::string& source, const std::string& destination)
     return {};
 }
 
-Result<void> copyFileContents(const std::string& source, const std::string& destination) {
+Result<void> copyFileContents(const Place& source, const Place& destination) {
     const auto from = openRegularFile(source, O_RDONLY);
     if (!from) return from.error();
     auto to = createFile(destination, kOrdinaryFile);
@@ -114,7 +114,7 @@ Result<void> copyFileContents(const std::string& source, const std::string& dest
 
     HalfMadeFile halfMade(destination);
     if (auto done = copyContents(*from, *to); !done) return done;
-    if (auto done = flush(to->number(), destination); !done) return done;
+    if (auto done = flush(to->number(), destination.path); !done) return done;
     if (auto done = closeReporting(*to); !done) return done;
     if (auto done = flushDirectoryOf(destination); !done) return done;
     halfMade.keep();

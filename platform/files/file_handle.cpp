@@ -39,12 +39,12 @@ class LocalFileHandle final : public FileHandle {
         const off_t size = offset("reserve room in", length);
         const off_t from = offset("reserve room in", position());
         // fallocate, which leaves the file as long as it is, does not ask for this one.
-        if (exceedsFileSizeLimit(from, size)) fail("reserve room in", Error::posix(EFBIG, file_.path));
+        if (exceedsFileSizeLimit(from, size)) fail("reserve room in", Error::posix(EFBIG, file_.path()));
         const int mode = FALLOC_FL_KEEP_SIZE;
         if (uninterrupted([&] { return fallocate(file_.number(), mode, from, size); }) == 0) return;
         // No promise to be had here: the writing itself will tell.
         if (errno == EOPNOTSUPP || errno == ENOSYS) return;
-        fail("reserve room in", lastError(file_.path));
+        fail("reserve room in", lastError(file_.path()));
     }
 
     void write(ByteView bytes) override {
@@ -54,11 +54,11 @@ class LocalFileHandle final : public FileHandle {
     void truncate(std::uint64_t length) override {
         const off_t size = offset("truncate", length);
         if (uninterrupted([&] { return ftruncate(file_.number(), size); }) != 0)
-            fail("truncate", lastError(file_.path));
+            fail("truncate", lastError(file_.path()));
     }
 
     void synchronize() override {
-        if (const auto done = flush(file_.number(), file_.path); !done) fail("synchronize", done.error());
+        if (const auto done = flush(file_.number(), file_.path()); !done) fail("synchronize", done.error());
     }
 
     void close() override {
@@ -68,7 +68,7 @@ class LocalFileHandle final : public FileHandle {
 
   private:
     [[noreturn]] void fail(const char* attempt, const Error& error) const {
-        throw FileHandleError(std::string("Cannot ") + attempt + " " + file_.path + ": " +
+        throw FileHandleError(std::string("Cannot ") + attempt + " " + file_.path() + ": " +
                               error.localizedFailureReason());
     }
 
@@ -80,7 +80,7 @@ class LocalFileHandle final : public FileHandle {
 
     std::uint64_t moveTo(off_t distance, int from) {
         const off_t now = uninterrupted([&] { return lseek(file_.number(), distance, from); });
-        if (now < 0) fail("seek in", lastError(file_.path));
+        if (now < 0) fail("seek in", lastError(file_.path()));
         return static_cast<std::uint64_t>(now);
     }
 
@@ -89,9 +89,10 @@ class LocalFileHandle final : public FileHandle {
 
 }  // namespace
 
-Result<std::unique_ptr<FileHandle>> openFileHandle(const std::string& path, int access) {
-    auto file = openRegularFile(path, access);
+Result<std::unique_ptr<FileHandle>> openFileHandle(const Place& place, int access) {
+    auto file = openRegularFile(place, access);
     if (!file) return file.error();
+    file->place.parent.reset();  // a handle needs the path alone, for its errors
     return std::unique_ptr<FileHandle>(std::make_unique<LocalFileHandle>(std::move(*file)));
 }
 

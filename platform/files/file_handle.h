@@ -2,13 +2,12 @@
 #pragma once
 
 #include <memory>
-#include <string>
 
-#include "files/file_manager.h"
+#include "files/posix.h"
 
 namespace pinwell::files {
 
-/// A handle on the regular file at `path`; `access` is O_RDONLY or O_RDWR.
-Result<std::unique_ptr<FileHandle>> openFileHandle(const std::string& path, int access);
+/// A handle on the regular file at `place`; `access` is O_RDONLY or O_RDWR.
+Result<std::unique_ptr<FileHandle>> openFileHandle(const Place& place, int access);
 
 }  // namespace pinwell::files

@@ -2,8 +2,8 @@
 //
 // All calls block and may be made from any thread; one handle serves one thread at a time. Errors are of
 // kPOSIXErrorDomain and name the path; a URL that is no file's, or a path with a zero byte in it, is EINVAL.
-// Nothing is ever written through a symbolic link in the last path component. Every file is opened
-// close-on-exec.
+// Nothing is ever written through a symbolic link in the last path component, and nothing below a held item
+// is reached through one that leads out of it (EXDEV). Every file is opened close-on-exec.
 #pragma once
 
 #include <cstdint>
@@ -14,6 +14,7 @@
 
 #include "files/file_reader.h"
 #include "foundation/error.h"
+#include "foundation/places.h"
 #include "foundation/url.h"
 
 namespace pinwell::files {
@@ -34,17 +35,14 @@ struct ItemFacts {
 };
 
 /// What tells an item as it is now from the same path later: another file in its place, another length, other
-/// contents. A change that keeps the length, in the same tick of the file system's clock as the one before it
-/// (4 ms or so before Linux 6.13), does not show.
+/// contents. Its mode, its links and its attributes do not count. A change that keeps the length, in the same
+/// tick of the file system's clock as the one before it (4 ms or so before Linux 6.13), does not show.
 struct ItemState {
     std::uint64_t device = 0;
     std::uint64_t inode = 0;
     std::uint64_t size = 0;
-    // Contents, and anything at all; since the epoch.
-    std::int64_t modifiedSeconds = 0;
+    std::int64_t modifiedSeconds = 0;  // since the epoch
     std::int64_t modifiedNanoseconds = 0;
-    std::int64_t changedSeconds = 0;
-    std::int64_t changedNanoseconds = 0;
 
     bool operator==(const ItemState&) const = default;
 };
@@ -117,17 +115,23 @@ class FileManager {
     virtual Result<ItemState> stateOfItem(const URL& item) = 0;
 
     /// An advisory lock (flock(2), exclusive) on the file or directory that the path names once the lock is
-    /// had, whatever stood there when the waiting began. Waits for a minute at most (EBUSY). Other errors say
-    /// that there is nothing to lock, or that its file system knows no locks. Nothing is kept from those who
-    /// do not ask.
-    virtual Result<std::unique_ptr<ItemLock>> lockItem(const URL& item) = 0;
+    /// had, whatever stood there when the waiting began. It does not block processes that do not take it:
+    /// file systems that would make it do so (CIFS, SMB) are refused with EOPNOTSUPP. Calls `waiting` once if
+    /// another process holds the lock, and waits for a minute at most (EBUSY). Other errors say that there is
+    /// nothing to lock, or that its file system knows no locks.
+    virtual Result<std::unique_ptr<ItemLock>> lockItem(const URL& item,
+                                                       const std::function<void()>& waiting) = 0;
+
+    /// Holds the item: until the result dies, this manager finds it, and for a directory all below it, from
+    /// the descriptor that is opened now (foundation::Places).
+    virtual Result<foundation::Anchor> holdItem(const URL& item) = 0;
 
     /// Main executable of the directory, opened as a bundle.
     virtual std::optional<URL> mainExecutableOfBundle(const URL& directory) = 0;
 
-    /// Whether the file system can clone that very file (reflink), found by asking it with a clone into a
-    /// file without a name in the same directory. Leaves nothing behind; an error is a question that could
-    /// not be put.
+    /// Whether the file system can clone that very file (reflink), found by asking it without making a file
+    /// (but for a file without a name where the item is another user's and may only be read). An error is a
+    /// question that could not be put.
     virtual Result<bool> volumeSupportsCloning(const URL& item) = 0;
 
     /// A fresh directory of mode 0700 beside `item`, named `.pinwell-replacement-` and six random characters.
@@ -180,7 +184,10 @@ class FileManager {
     virtual URL temporaryDirectory() = 0;
 };
 
-/// The file manager of this machine. `typeNaming` must be callable, from any thread.
-std::unique_ptr<FileManager> makeLocalFileManager(TypeNaming typeNaming);
+/// The file manager of this machine. `typeNaming` must be callable, from any thread. Files are found through
+/// `places`, which other services may share.
+std::unique_ptr<FileManager> makeLocalFileManager(
+    TypeNaming typeNaming,
+    std::shared_ptr<foundation::Places> places = std::make_shared<foundation::Places>());
 
 }  // namespace pinwell::files

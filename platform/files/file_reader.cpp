@@ -57,7 +57,9 @@ class DescriptorReader final : public FileReader {
 
 Result<std::unique_ptr<FileReader>> openReader(const std::string& path) {
     if (path.find('\0') != std::string::npos) return Error::posix(EINVAL, path);
-    auto file = openFileHandle(path, O_RDONLY);
+    const auto place = Places().find(path);
+    if (!place) return place.error();
+    auto file = openFileHandle(*place, O_RDONLY);
     if (!file) return file.error();
     return std::unique_ptr<FileReader>(*std::move(file));
 }

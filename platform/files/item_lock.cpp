@@ -2,11 +2,12 @@
 
 #include <fcntl.h>
 #include <sys/file.h>
+#include <sys/vfs.h>
 
+#include <algorithm>
+#include <array>
 #include <thread>
 #include <utility>
-
-#include "files/posix.h"
 
 namespace pinwell::files {
 namespace {
@@ -28,18 +29,27 @@ bool isSameItem(const struct stat& one, const struct stat& other) {
     return one.st_dev == other.st_dev && one.st_ino == other.st_ino;
 }
 
-Result<FileDescriptor> openToLock(const std::string& path) {
-    const auto status = statusOfItem(path);
+Result<FileDescriptor> openToLock(const Place& place) {
+    const auto status = statusOfItem(place);
     if (!status) return status.error();
-    if (S_ISDIR(status->st_mode)) return openDirectory(path, LastLink::refused);
-    auto file = openRegularFile(path, O_RDONLY);
+    if (S_ISDIR(status->st_mode)) return openDirectory(place);
+    auto file = openRegularFile(place, O_RDONLY);
     if (!file) return file.error();
     return std::move(file->descriptor);
 }
 
-Result<void> lockBefore(Clock::time_point deadline, int descriptor, const std::string& path) {
+Result<void> refuseMandatoryLocks(int descriptor, const std::string& path) {
+    struct statfs fileSystem {};
+    if (uninterrupted([&] { return fstatfs(descriptor, &fileSystem); }) != 0) return lastError(path);
+    if (hasMandatoryLocks(fileSystem.f_type)) return Error::posix(EOPNOTSUPP, path);
+    return {};
+}
+
+Result<void> lockBefore(Clock::time_point deadline, int descriptor, const std::string& path,
+                        const std::function<void()>& waiting, bool& hasWaited) {
     while (uninterrupted([&] { return flock(descriptor, LOCK_EX | LOCK_NB); }) != 0) {
         if (errno != EWOULDBLOCK) return lastError(path);
+        if (!std::exchange(hasWaited, true)) waiting();
         if (Clock::now() >= deadline) return Error::posix(EBUSY, path);
         std::this_thread::sleep_for(kRetryInterval);
     }
@@ -48,17 +58,31 @@ Result<void> lockBefore(Clock::time_point deadline, int descriptor, const std::s
 
 }  // namespace
 
-Result<std::unique_ptr<ItemLock>> lockPath(const std::string& path, std::chrono::milliseconds patience) {
+bool hasMandatoryLocks(std::int64_t fileSystemType) {
+    // Of linux/magic.h, in 32 bits: some processors have the field signed.
+    constexpr std::array<std::uint32_t, 3> kTypes{0x517B, 0xFF534D42, 0xFE534D42};  // SMB, CIFS, SMB2
+    return std::find(kTypes.begin(), kTypes.end(), static_cast<std::uint32_t>(fileSystemType)) !=
+           kTypes.end();
+}
+
+Result<std::unique_ptr<ItemLock>> lockPath(const Places& places, const std::string& path,
+                                           std::chrono::milliseconds patience,
+                                           const std::function<void()>& waiting) {
     const auto deadline = Clock::now() + patience;
+    bool hasWaited = false;
     for (;;) {
-        auto descriptor = openToLock(path);
+        const auto place = places.find(path);
+        if (!place) return place.error();
+        auto descriptor = openToLock(*place);
         if (!descriptor) return descriptor.error();
-        if (auto done = lockBefore(deadline, descriptor->get(), path); !done) return done.error();
+        if (auto done = refuseMandatoryLocks(descriptor->get(), path); !done) return done.error();
+        if (auto done = lockBefore(deadline, descriptor->get(), path, waiting, hasWaited); !done)
+            return done.error();
 
         // Who held the lock may have put another file in this one's place, which is then not locked at all.
         struct stat locked {};
         if (fstat(descriptor->get(), &locked) != 0) return lastError(path);
-        const auto named = statusOfItem(path);
+        const auto named = statusOfItem(*place);
         if (!named) return named.error();
         if (isSameItem(locked, *named))
             return std::unique_ptr<ItemLock>(std::make_unique<DescriptorLock>(*std::move(descriptor)));

@@ -1,7 +1,5 @@
 #include "files/item_properties.h"
 
-#include "files/posix.h"
-
 namespace pinwell::files {
 
 Dictionary ResourceProperties::dictionary() const {
@@ -10,12 +8,13 @@ Dictionary ResourceProperties::dictionary() const {
             {"typeIdentifier", typeIdentifier}, {"localizedTypeDescription", localizedTypeDescription}};
 }
 
-Result<ResourceProperties> resourcePropertiesOfItem(const URL& item, const TypeNaming& typeNaming) {
-    const auto status = statusOfItem(item.path());
+Result<ResourceProperties> resourcePropertiesOfItem(const Place& place, const std::string& name,
+                                                    const TypeNaming& typeNaming) {
+    const auto status = statusOfItem(place);
     if (!status) return status.error();
 
     ItemFacts facts;
-    facts.name = item.lastPathComponent();
+    facts.name = name;
     facts.isDirectory = S_ISDIR(status->st_mode);
     facts.isRegularFile = S_ISREG(status->st_mode);
     facts.isSymbolicLink = S_ISLNK(status->st_mode);
@@ -26,20 +25,18 @@ Result<ResourceProperties> resourcePropertiesOfItem(const URL& item, const TypeN
                               facts.isSymbolicLink, type.identifier, type.localizedDescription};
 }
 
-Result<ItemState> stateOfItemAt(const std::string& path) {
-    const auto status = statusOfItem(path);
+Result<ItemState> stateOfItemAt(const Place& place) {
+    const auto status = statusOfItem(place);
     if (!status) return status.error();
     return ItemState{.device = status->st_dev,
                      .inode = status->st_ino,
                      .size = static_cast<std::uint64_t>(status->st_size),
                      .modifiedSeconds = status->st_mtim.tv_sec,
-                     .modifiedNanoseconds = status->st_mtim.tv_nsec,
-                     .changedSeconds = status->st_ctim.tv_sec,
-                     .changedNanoseconds = status->st_ctim.tv_nsec};
+                     .modifiedNanoseconds = status->st_mtim.tv_nsec};
 }
 
-Result<bool> itemIsRegularFile(const std::string& path) {
-    const auto status = statusOfItem(path);
+Result<bool> itemIsRegularFile(const Place& place) {
+    const auto status = statusOfItem(place);
     if (!status) return status.error();
     return S_ISREG(status->st_mode);
 }

@@ -1,15 +1,15 @@
 // Questions about an item itself, none of which opens it. For this folder only.
 #pragma once
 
-#include <string>
-
-#include "files/file_manager.h"
+#include "files/posix.h"
 
 namespace pinwell::files {
 
-Result<ResourceProperties> resourcePropertiesOfItem(const URL& item, const TypeNaming& typeNaming);
-Result<ItemState> stateOfItemAt(const std::string& path);
+/// `name` is the last component of the item's path.
+Result<ResourceProperties> resourcePropertiesOfItem(const Place& place, const std::string& name,
+                                                    const TypeNaming& typeNaming);
+Result<ItemState> stateOfItemAt(const Place& place);
 
-Result<bool> itemIsRegularFile(const std::string& path);
+Result<bool> itemIsRegularFile(const Place& place);
 
 }  // namespace pinwell::files

@@ -1,6 +1,8 @@
 #include <fcntl.h>
 
+#include <mutex>
 #include <utility>
+#include <vector>
 
 #include "files/bundle_executable.h"
 #include "files/cloning.h"
@@ -26,94 +28,132 @@ Result<std::string> pathOf(const URL& url) {
     return url.path();
 }
 
-// What `operation` makes of the path, or why there is none.
-template <class Operation>
-auto onPath(const URL& url, Operation operation) -> decltype(operation(std::string())) {
-    const auto path = pathOf(url);
-    if (!path) return path.error();
-    return operation(*path);
-}
-
-Result<URL> asURL(const Result<std::string>& path) {
-    if (!path) return path.error();
-    return URL::fileURLWithPath(*path);
-}
-
 class LocalFileManager final : public FileManager {
   public:
-    explicit LocalFileManager(TypeNaming typeNaming) : typeNaming_(std::move(typeNaming)) {}
+    LocalFileManager(TypeNaming typeNaming, std::shared_ptr<Places> places)
+        : typeNaming_(std::move(typeNaming)), places_(std::move(places)) {}
 
     Result<ResourceProperties> resourceProperties(const URL& item) override {
-        return onPath(item, [&](const std::string&) { return resourcePropertiesOfItem(item, typeNaming_); });
+        return at(item, [&](const Place& place) {
+            return resourcePropertiesOfItem(place, item.lastPathComponent(), typeNaming_);
+        });
     }
 
-    Result<bool> isRegularFile(const URL& item) override { return onPath(item, itemIsRegularFile); }
+    Result<bool> isRegularFile(const URL& item) override { return at(item, itemIsRegularFile); }
 
-    Result<ItemState> stateOfItem(const URL& item) override { return onPath(item, stateOfItemAt); }
+    Result<ItemState> stateOfItem(const URL& item) override { return at(item, stateOfItemAt); }
 
-    Result<std::unique_ptr<ItemLock>> lockItem(const URL& item) override {
-        return onPath(item, [](const std::string& path) { return lockPath(path, kLockPatience); });
+    Result<std::unique_ptr<ItemLock>> lockItem(const URL& item,
+                                               const std::function<void()>& waiting) override {
+        const auto path = pathOf(item);
+        if (!path) return path.error();
+        return lockPath(*places_, *path, kLockPatience, waiting);
+    }
+
+    Result<foundation::Anchor> holdItem(const URL& item) override {
+        const auto path = pathOf(item);
+        if (!path) return path.error();
+        return places_->hold(*path);
     }
 
     std::optional<URL> mainExecutableOfBundle(const URL& directory) override {
-        return pathOf(directory) ? mainExecutableIn(directory) : std::nullopt;
+        return pathOf(directory) ? mainExecutableIn(*places_, directory) : std::nullopt;
     }
 
-    Result<bool> volumeSupportsCloning(const URL& item) override { return onPath(item, fileSupportsCloning); }
+    Result<bool> volumeSupportsCloning(const URL& item) override { return at(item, fileSupportsCloning); }
 
     Result<URL> createReplacementDirectory(const URL& item) override {
-        return asURL(onPath(item, makeReplacementDirectory));
+        const auto made = at(item, makeReplacementDirectory);
+        if (!made) return made.error();
+        // What is put there is found where it was put, whoever moves the directory's parents meanwhile.
+        if (auto held = places_->hold(*made)) {
+            const std::lock_guard lock(mutex_);
+            replacementDirectories_.push_back(*std::move(held));
+        }
+        return URL::fileURLWithPath(*made);
     }
 
     Result<void> copyItem(const URL& source, const URL& destination) override {
-        return onPath(source, [&](const std::string& from) {
-            return onPath(destination, [&](const std::string& to) { return copyFile(from, to); });
-        });
+        return between(source, destination, copyFile);
     }
 
     Result<void> copyContents(const URL& source, const URL& destination) override {
-        return onPath(source, [&](const std::string& from) {
-            return onPath(destination, [&](const std::string& to) { return copyFileContents(from, to); });
-        });
+        return between(source, destination, copyFileContents);
     }
 
-    Result<void> removeItem(const URL& item) override { return onPath(item, removeTree); }
+    Result<void> removeItem(const URL& item) override {
+        letGo(item);
+        return at(item, removeTree);
+    }
 
     Result<void> replaceItem(const URL& original, const URL& replacement) override {
-        return onPath(original, [&](const std::string& to) {
-            return onPath(replacement, [&](const std::string& from) { return replaceFile(to, from); });
+        return between(original, replacement, [&](const Place& to, const Place& from) {
+            const URL emptied = replacement.deletingLastPathComponent();
+            letGo(emptied);
+            return at(emptied, [&](const Place& directory) { return replaceFile(to, from, directory); });
         });
     }
 
-    Result<URL> trashItem(const URL& item) override { return asURL(onPath(item, moveToTrash)); }
+    Result<URL> trashItem(const URL& item) override {
+        const auto trashed = at(item, moveToTrash);
+        if (!trashed) return trashed.error();
+        return URL::fileURLWithPath(*trashed);
+    }
 
-    Result<Data> contentsOfFile(const URL& file) override { return onPath(file, readWholeFile); }
+    Result<Data> contentsOfFile(const URL& file) override { return at(file, readWholeFile); }
 
     Result<void> writeFile(ByteView contents, const URL& file, Writing writing) override {
-        return onPath(file, [&](const std::string& path) {
-            return writing == Writing::atomic ? writeFileAtomically(contents, path)
-                                              : writeFilePlainly(contents, path);
+        return at(file, [&](const Place& place) {
+            return writing == Writing::atomic ? writeFileAtomically(contents, place)
+                                              : writeFilePlainly(contents, place);
         });
     }
 
     Result<std::unique_ptr<FileHandle>> openForReading(const URL& file) override {
-        return onPath(file, [](const std::string& path) { return openFileHandle(path, O_RDONLY); });
+        return at(file, [](const Place& place) { return openFileHandle(place, O_RDONLY); });
     }
 
     Result<std::unique_ptr<FileHandle>> openForUpdating(const URL& file) override {
-        return onPath(file, [](const std::string& path) { return openFileHandle(path, O_RDWR); });
+        return at(file, [](const Place& place) { return openFileHandle(place, O_RDWR); });
     }
 
     URL temporaryDirectory() override { return foundation::temporaryDirectory(); }
 
   private:
+    // What `operation` makes of the place that the URL names, or why there is none.
+    template <class Operation>
+    auto at(const URL& url, Operation operation) -> decltype(operation(std::declval<const Place&>())) {
+        const auto path = pathOf(url);
+        if (!path) return path.error();
+        const auto place = places_->find(*path);
+        if (!place) return place.error();
+        return operation(*place);
+    }
+
+    template <class Operation>
+    Result<void> between(const URL& one, const URL& other, Operation operation) {
+        return at(one, [&](const Place& first) {
+            return at(other, [&](const Place& second) { return operation(first, second); });
+        });
+    }
+
+    // A replacement directory that is to go is found as an entry of the one that it stands in.
+    void letGo(const URL& directory) {
+        const std::lock_guard lock(mutex_);
+        std::erase_if(replacementDirectories_,
+                      [&](const auto& anchor) { return anchor->item() == directory.path(); });
+    }
+
     TypeNaming typeNaming_;
+    std::shared_ptr<Places> places_;
+    std::mutex mutex_;
+    std::vector<foundation::Anchor> replacementDirectories_;
 };
 
 }  // namespace
 
-std::unique_ptr<FileManager> makeLocalFileManager(TypeNaming typeNaming) {
-    return std::make_unique<LocalFileManager>(std::move(typeNaming));
+std::unique_ptr<FileManager> makeLocalFileManager(TypeNaming typeNaming, std::shared_ptr<Places> places) {
+    return std::make_unique<LocalFileManager>(std::move(typeNaming), std::move(places));
 }
 
 }  // namespace pinwell::files

@@ -31,7 +31,7 @@ Result<AttributeNames> attributeNames(const OpenFile& file) {
     const ssize_t length = uninterrupted([&] { return flistxattr(file.number(), list.data(), list.size()); });
     if (length < 0) {
         if (cannotBeKept(errno)) return AttributeNames{};
-        return lastError(file.path);
+        return lastError(file.path());
     }
     AttributeNames names;
     for (std::size_t at = 0; at < static_cast<std::size_t>(length);) {
@@ -57,12 +57,12 @@ Result<void> carryAttribute(const OpenFile& from, const OpenFile& to, const std:
     if (length < 0) {
         // Gone since the list was made, or not ours to read.
         if (errno == ENODATA || !isOwners(name)) return {};
-        return lastError(from.path);
+        return lastError(from.path());
     }
     const auto size = static_cast<std::size_t>(length);
     if (uninterrupted([&] { return fsetxattr(to.number(), name.c_str(), value.data(), size, 0); }) != 0) {
         const bool notOurs = !isOwners(name) && (errno == EPERM || errno == EACCES || errno == EINVAL);
-        if (!notOurs && !cannotBeKept(errno)) return lastError(to.path);
+        if (!notOurs && !cannotBeKept(errno)) return lastError(to.path());
     }
     return {};
 }
@@ -73,7 +73,7 @@ Result<void> dropForeignAttributes(const OpenFile& to, const AttributeNames& wan
     for (const std::string& name : *present) {
         if (!isOwners(name) || contains(wanted, name)) continue;
         if (uninterrupted([&] { return fremovexattr(to.number(), name.c_str()); }) != 0 && errno != ENODATA)
-            return lastError(to.path);
+            return lastError(to.path());
     }
     return {};
 }
@@ -95,7 +95,7 @@ Result<void> carryOwner(const struct stat& wanted, const OpenFile& to) {
     for (const uid_t owner : {wanted.st_uid, kUnchanged}) {
         if (uninterrupted([&] { return fchown(to.number(), owner, wanted.st_gid); }) == 0) return {};
         // EINVAL: the identity has no meaning in this user namespace.
-        if (errno != EPERM && errno != EINVAL && !cannotBeKept(errno)) return lastError(to.path);
+        if (errno != EPERM && errno != EINVAL && !cannotBeKept(errno)) return lastError(to.path());
     }
     return {};
 }
@@ -103,7 +103,7 @@ Result<void> carryOwner(const struct stat& wanted, const OpenFile& to) {
 // The mode for a file of which owner, group and access control list may not all have been carried.
 Result<mode_t> permittedMode(const struct stat& wanted, const OpenFile& to, bool wantsAccessControlList) {
     struct stat got {};
-    if (fstat(to.number(), &got) != 0) return lastError(to.path);
+    if (fstat(to.number(), &got) != 0) return lastError(to.path());
     mode_t mode = wanted.st_mode & 07777U;
     if (got.st_uid != wanted.st_uid) mode &= ~static_cast<mode_t>(S_ISUID);
     if (got.st_gid != wanted.st_gid) mode &= ~static_cast<mode_t>(S_ISGID);
@@ -120,25 +120,26 @@ Result<mode_t> permittedMode(const struct stat& wanted, const OpenFile& to, bool
 
 Result<void> carryMetadata(const OpenFile& from, const OpenFile& to) {
     struct stat wanted {};
-    if (fstat(from.number(), &wanted) != 0) return lastError(from.path);
+    if (fstat(from.number(), &wanted) != 0) return lastError(from.path());
     const auto names = attributeNames(from);
     if (!names) return names.error();
 
     // In this order: nobody else gets in before all is in place, the owner can still write attributes
     // although the final mode may be read-only, and changing the owner clears file capabilities and set-ID
     // bits.
-    if (uninterrupted([&] { return fchmod(to.number(), S_IRUSR | S_IWUSR); }) != 0) return lastError(to.path);
+    if (uninterrupted([&] { return fchmod(to.number(), S_IRUSR | S_IWUSR); }) != 0)
+        return lastError(to.path());
     if (auto done = carryOwner(wanted, to); !done) return done;
     if (auto done = carryAttributes(from, to, *names); !done) return done;
     const auto mode = permittedMode(wanted, to, contains(*names, kAccessControlList));
     if (!mode) return mode.error();
-    if (uninterrupted([&] { return fchmod(to.number(), *mode); }) != 0) return lastError(to.path);
+    if (uninterrupted([&] { return fchmod(to.number(), *mode); }) != 0) return lastError(to.path());
     return {};
 }
 
 Result<void> carryTimes(const OpenFile& from, const OpenFile& to) {
     const std::array<timespec, 2> times{from.status.st_atim, from.status.st_mtim};
-    if (uninterrupted([&] { return futimens(to.number(), times.data()); }) != 0) return lastError(to.path);
+    if (uninterrupted([&] { return futimens(to.number(), times.data()); }) != 0) return lastError(to.path());
     return {};
 }
 

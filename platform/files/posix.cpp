@@ -4,7 +4,9 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <cstdlib>
+#include <array>
+#include <cstdio>
+#include <system_error>
 #include <utility>
 
 namespace pinwell::files {
@@ -14,11 +16,11 @@ namespace {
 // good.
 constexpr int kSafeFlags = O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY;
 
-Result<OpenFile> regularFile(FileDescriptor descriptor, const std::string& path) {
-    OpenFile file{std::move(descriptor), path, {}};
-    if (fstat(file.number(), &file.status) != 0) return lastError(path);
+Result<OpenFile> regularFile(FileDescriptor descriptor, Place place) {
+    OpenFile file{std::move(descriptor), std::move(place), {}};
+    if (fstat(file.number(), &file.status) != 0) return lastError(file.path());
     if (const int reason = notRegularReason(file.status.st_mode); reason != 0)
-        return Error::posix(reason, path);
+        return Error::posix(reason, file.path());
     return file;
 }
 
@@ -30,9 +32,11 @@ std::string directoryOf(const std::string& path) {
     return slash == 0 ? "/" : path.substr(0, slash);
 }
 
-Result<struct stat> statusOfItem(const std::string& path) {
+Result<struct stat> statusOfItem(const Place& place) {
     struct stat status {};
-    if (uninterrupted([&] { return lstat(path.c_str(), &status); }) != 0) return lastError(path);
+    const int done = uninterrupted(
+        [&] { return fstatat(place.directory(), place.name.c_str(), &status, AT_SYMLINK_NOFOLLOW); });
+    if (done != 0) return lastError(place.path);
     return status;
 }
 
@@ -42,45 +46,69 @@ int notRegularReason(mode_t mode) {
     return S_ISLNK(mode) ? ELOOP : EINVAL;
 }
 
-Result<OpenFile> openRegularFile(const std::string& path, int access) {
+Result<OpenFile> openRegularFile(const Place& place, int access) {
     // Opening alone can set a device to work, so the look comes first.
-    const auto before = statusOfItem(path);
+    const auto before = statusOfItem(place);
     if (!before) return before.error();
-    if (const int reason = notRegularReason(before->st_mode); reason != 0) return Error::posix(reason, path);
+    if (const int reason = notRegularReason(before->st_mode); reason != 0)
+        return Error::posix(reason, place.path);
 
-    FileDescriptor descriptor(uninterrupted([&] { return open(path.c_str(), access | kSafeFlags); }));
-    if (!descriptor) return lastError(path);
-    return regularFile(std::move(descriptor), path);
-}
-
-Result<OpenFile> createFile(const std::string& path, mode_t mode) {
     FileDescriptor descriptor(
-        uninterrupted([&] { return open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | kSafeFlags, mode); }));
-    if (!descriptor) return lastError(path);
-    HalfMadeFile halfMade(path);
-    auto file = regularFile(std::move(descriptor), path);
+        uninterrupted([&] { return openat(place.directory(), place.name.c_str(), access | kSafeFlags); }));
+    if (!descriptor) return lastError(place.path);
+    return regularFile(std::move(descriptor), place);
+}
+
+Result<OpenFile> createFile(const Place& place, mode_t mode) {
+    constexpr int kFlags = O_WRONLY | O_CREAT | O_EXCL | kSafeFlags;
+    FileDescriptor descriptor(
+        uninterrupted([&] { return openat(place.directory(), place.name.c_str(), kFlags, mode); }));
+    if (!descriptor) return lastError(place.path);
+    HalfMadeFile halfMade(place);
+    auto file = regularFile(std::move(descriptor), place);
     if (file) halfMade.keep();
     return file;
 }
 
-Result<OpenFile> createTemporaryFile(const std::string& directory) {
-    std::string path;
-    FileDescriptor descriptor(uninterrupted([&] {
-        path = directory + "/.pinwell-XXXXXX";  // anew each time: a failure, too, uses the pattern up
-        return mkostemp(path.data(), O_CLOEXEC);
+Result<OpenFile> createTemporaryFileBeside(const Place& place) {
+    constexpr int kFlags = O_RDWR | O_CREAT | O_EXCL | kSafeFlags;
+    Place temporary{place.parent, {}, {}};
+    FileDescriptor descriptor(underFreshName(".pinwell-", temporary.name, [&](const char* name) {
+        return openat(place.directory(), name, kFlags, kPrivateFile);
     }));
+    const std::string directory = directoryOf(place.path);
     if (!descriptor) return lastError(directory);
-    HalfMadeFile halfMade(path);
-    auto file = regularFile(std::move(descriptor), path);
+    temporary.path = directory + "/" + temporary.name;
+    HalfMadeFile halfMade(temporary);
+    auto file = regularFile(std::move(descriptor), std::move(temporary));
     if (file) halfMade.keep();
     return file;
 }
 
-Result<FileDescriptor> openDirectory(const std::string& path, LastLink link) {
-    const int flags = O_RDONLY | O_DIRECTORY | O_CLOEXEC | (link == LastLink::refused ? O_NOFOLLOW : 0);
-    FileDescriptor descriptor(uninterrupted([&] { return open(path.c_str(), flags); }));
-    if (!descriptor) return lastError(path);
+std::string freshName(std::string_view prefix) {
+    constexpr std::string_view kLetters = "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789";
+    std::array<unsigned char, kRandomLetters> random{};
+    if (getentropy(random.data(), random.size()) != 0)
+        throw std::system_error(errno, std::generic_category(), "getentropy");
+    std::string name(prefix);
+    // Not evenly spread, and no need to be: the name must be hard to guess, not secret.
+    for (const unsigned char byte : random) name += kLetters[byte % kLetters.size()];
+    return name;
+}
+
+Result<FileDescriptor> openDirectory(const Place& place) {
+    constexpr int kFlags = O_RDONLY | O_DIRECTORY | O_CLOEXEC | O_NOFOLLOW;
+    FileDescriptor descriptor(
+        uninterrupted([&] { return openat(place.directory(), place.name.c_str(), kFlags); }));
+    if (!descriptor) return lastError(place.path);
     return descriptor;
+}
+
+Result<void> renameItem(const Place& from, const Place& to) {
+    const int done = uninterrupted(
+        [&] { return renameat(from.directory(), from.name.c_str(), to.directory(), to.name.c_str()); });
+    if (done != 0) return lastError(to.path);
+    return {};
 }
 
 Result<void> writeAll(const OpenFile& file, ByteView bytes) {
@@ -88,7 +116,7 @@ Result<void> writeAll(const OpenFile& file, ByteView bytes) {
         const auto piece = bytes.first(std::min(bytes.size(), kPieceSize));
         const ssize_t count =
             uninterrupted([&] { return ::write(file.number(), piece.data(), piece.size()); });
-        if (count < 0) return lastError(file.path);
+        if (count < 0) return lastError(file.path());
         bytes = bytes.subspan(static_cast<std::size_t>(count));
     }
     return {};
@@ -97,7 +125,7 @@ Result<void> writeAll(const OpenFile& file, ByteView bytes) {
 Result<Data> readUpTo(const OpenFile& file, std::uint64_t length) {
     auto data = readPieces(
         length, [&](std::byte* into, std::size_t size) { return ::read(file.number(), into, size); });
-    if (!data) return lastError(file.path);
+    if (!data) return lastError(file.path());
     return *std::move(data);
 }
 
@@ -106,15 +134,15 @@ Result<void> flush(int descriptor, const std::string& path) {
     return {};
 }
 
-Result<void> flushDirectoryOf(const std::string& path) {
-    const std::string directoryPath = directoryOf(path);
-    const auto directory = openDirectory(directoryPath, LastLink::followed);
+Result<void> flushDirectoryOf(const Place& place) {
+    const Place parent{place.parent, ".", directoryOf(place.path)};
+    const auto directory = openDirectory(parent);
     if (!directory) {
         // One may write to a directory that one may not read.
         if (directory.error().code() == EACCES) return {};
         return directory.error();
     }
-    auto done = flush(directory->get(), directoryPath);
+    auto done = flush(directory->get(), parent.path);
     // EINVAL: a file system (of shared folders, say) that cannot flush directories, fsync(2).
     if (!done && done.error().code() == EINVAL) return {};
     return done;
@@ -122,14 +150,14 @@ Result<void> flushDirectoryOf(const std::string& path) {
 
 Result<void> closeReporting(OpenFile& file) {
     // Never again after EINTR: on Linux the number is free by then, and may be another thread's new file.
-    if (::close(file.descriptor.release()) != 0 && errno != EINTR) return lastError(file.path);
+    if (::close(file.descriptor.release()) != 0 && errno != EINTR) return lastError(file.path());
     return {};
 }
 
 HalfMadeFile::~HalfMadeFile() {
     if (kept_) return;
     const int reason = errno;
-    unlink(path_.c_str());
+    unlinkat(place_.directory(), place_.name.c_str(), 0);
     errno = reason;
 }
 

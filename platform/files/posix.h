@@ -8,14 +8,19 @@
 #include <cerrno>
 #include <optional>
 #include <string>
+#include <string_view>
+#include <utility>
 
 #include "files/file_manager.h"
 #include "foundation/file_io.h"
+#include "foundation/places.h"
 
 namespace pinwell::files {
 
 using foundation::Error;
 using foundation::FileDescriptor;
+using foundation::Place;
+using foundation::Places;
 
 /// Largest piece that is read or written with one call, and so the most that memory grows by at a time.
 inline constexpr std::size_t kPieceSize = std::size_t{256} * 1024;
@@ -35,41 +40,61 @@ inline Error lastError(const std::string& path) {
     return Error::posix(errno, path);
 }
 
-/// An open regular file, with the path that its errors name and its status when it was opened.
+/// An open regular file, with its place, which its errors name, and its status when it was opened.
 struct OpenFile {
     FileDescriptor descriptor;
-    std::string path;
+    Place place;
     struct stat status {};
 
     int number() const noexcept { return descriptor.get(); }
+    const std::string& path() const noexcept { return place.path; }
 };
 
 /// The directory that a path's last component stands in.
 std::string directoryOf(const std::string& path);
 
 /// Status of the item itself, a link not followed.
-Result<struct stat> statusOfItem(const std::string& path);
+Result<struct stat> statusOfItem(const Place& place);
 
 /// Why an item of this type is not the regular file that was asked for; 0 when it is.
 int notRegularReason(mode_t mode);
 
 /// Opens what is a regular file before and after opening; never follows a link in the last component, never
 /// blocks, and never opens a device. `access` is O_RDONLY, O_WRONLY or O_RDWR.
-Result<OpenFile> openRegularFile(const std::string& path, int access);
+Result<OpenFile> openRegularFile(const Place& place, int access);
 
 /// Modes of a new file: its owner's alone, or what the umask leaves of everybody's.
 inline constexpr mode_t kPrivateFile = S_IRUSR | S_IWUSR;
 inline constexpr mode_t kOrdinaryFile = S_IRUSR | S_IWUSR | S_IRGRP | S_IWGRP | S_IROTH | S_IWOTH;
 
-/// Makes and opens a file for writing; there must be nothing at `path` yet.
-Result<OpenFile> createFile(const std::string& path, mode_t mode = kPrivateFile);
+/// Makes and opens a file for writing; there must be nothing at `place` yet.
+Result<OpenFile> createFile(const Place& place, mode_t mode = kPrivateFile);
 
-/// Makes and opens a hidden file of mode 0600 and of a name that was free, in `directory`.
-Result<OpenFile> createTemporaryFile(const std::string& directory);
+/// Makes and opens a hidden file of mode 0600 and of a name that was free, beside the item at `place`.
+Result<OpenFile> createTemporaryFileBeside(const Place& place);
 
-/// Opens the directory itself, a link in the last component not followed unless it is asked for.
-enum class LastLink { refused, followed };
-Result<FileDescriptor> openDirectory(const std::string& path, LastLink link);
+/// A name that nobody guesses: `prefix` and kRandomLetters letters and digits.
+inline constexpr std::size_t kRandomLetters = 6;
+std::string freshName(std::string_view prefix);
+
+/// Gives `make` fresh names until one is free: it returns -1, with EEXIST in errno, for one that is not.
+template <class Make>
+int underFreshName(std::string_view prefix, std::string& name, Make make) {
+    constexpr int kMaximumTries = 100;  // the 62^6 names of one prefix are never that full
+    int answer = -1;
+    for (int tries = 0; tries < kMaximumTries; ++tries) {
+        name = freshName(prefix);
+        answer = uninterrupted([&] { return make(name.c_str()); });
+        if (answer != -1 || errno != EEXIST) return answer;
+    }
+    return answer;
+}
+
+/// Opens the directory itself, a link not followed.
+Result<FileDescriptor> openDirectory(const Place& place);
+
+/// One rename; errors name the new place.
+Result<void> renameItem(const Place& from, const Place& to);
 
 Result<void> writeAll(const OpenFile& file, ByteView bytes);
 
@@ -97,9 +122,9 @@ Result<Data> readUpTo(const OpenFile& file, std::uint64_t length);
 /// Returns when what `descriptor` stands for is on stable storage.
 Result<void> flush(int descriptor, const std::string& path);
 
-/// The same for the directory that a path's last component stands in, and so for the name of what was made
-/// there; no failure where the file system has no such thing, or the directory may not be read.
-Result<void> flushDirectoryOf(const std::string& path);
+/// The same for the directory that an item stands in, and so for the name of what was made there; no failure
+/// where the file system has no such thing, or the directory may not be read.
+Result<void> flushDirectoryOf(const Place& place);
 
 /// Closes and reports what the file system has kept back until now.
 Result<void> closeReporting(OpenFile& file);
@@ -107,7 +132,7 @@ Result<void> closeReporting(OpenFile& file);
 /// Unlinks a file that was begun and not kept, so that no failure leaves half of one behind.
 class HalfMadeFile {
   public:
-    explicit HalfMadeFile(std::string path) : path_(std::move(path)) {}
+    explicit HalfMadeFile(Place place) : place_(std::move(place)) {}
     ~HalfMadeFile();
     HalfMadeFile(const HalfMadeFile&) = delete;
     HalfMadeFile& operator=(const HalfMadeFile&) = delete;
@@ -115,7 +140,7 @@ class HalfMadeFile {
     void keep() noexcept { kept_ = true; }
 
   private:
-    std::string path_;
+    Place place_;
     bool kept_ = false;
 };
 

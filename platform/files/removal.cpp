@@ -122,22 +122,21 @@ class TreeRemoval {
 
 }  // namespace
 
-Result<void> removeTree(const std::string& path) {
-    const std::string name = path.substr(path.rfind('/') + 1);
-    if (name == "..") return Error::posix(EINVAL, path);  // would empty the directory above
+Result<void> removeTree(const Place& place) {
+    if (place.name == "..") return Error::posix(EINVAL, place.path);  // would empty the directory above
 
-    switch (removeEntry(AT_FDCWD, path.c_str())) {
+    switch (removeEntry(place.directory(), place.name.c_str())) {
         case Outcome::removed:
             return {};
         case Outcome::failed:
-            return lastError(path);
+            return lastError(place.path);
         case Outcome::directoryNotEmpty:
             break;
     }
-    const std::string directory = directoryOf(path);
-    auto parent = openDirectory(directory, LastLink::followed);
+    const std::string directory = directoryOf(place.path);
+    auto parent = openDirectory({place.parent, ".", directory});
     if (!parent) return parent.error();
-    return TreeRemoval(std::move(*parent), directory == "/" ? std::string() : directory).run(name);
+    return TreeRemoval(std::move(*parent), directory == "/" ? std::string() : directory).run(place.name);
 }
 
 }  // namespace pinwell::files

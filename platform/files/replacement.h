@@ -3,14 +3,14 @@
 
 #include <string>
 
-#include "files/file_manager.h"
+#include "files/posix.h"
 
 namespace pinwell::files {
 
 /// As FileManager::createReplacementDirectory: `.pinwell-replacement-XXXXXX` beside `item`.
-Result<std::string> makeReplacementDirectory(const std::string& item);
+Result<std::string> makeReplacementDirectory(const Place& item);
 
-/// As FileManager::replaceItem.
-Result<void> replaceFile(const std::string& original, const std::string& replacement);
+/// As FileManager::replaceItem. `emptied` is the place of the directory that the replacement stands in.
+Result<void> replaceFile(const Place& original, const Place& replacement, const Place& emptied);
 
 }  // namespace pinwell::files

@@ -7,7 +7,6 @@
 #include <climits>
 #include <memory>
 
-#include "files/posix.h"
 #include "foundation/lazy_library.h"
 
 namespace pinwell::files {
@@ -89,9 +88,10 @@ Result<std::string> currentPath(int item, const std::string& path) {
 
 }  // namespace
 
-Result<std::string> moveToTrash(const std::string& path) {
-    const FileDescriptor item(
-        uninterrupted([&] { return open(path.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC); }));
+Result<std::string> moveToTrash(const Place& place) {
+    const std::string& path = place.path;
+    const FileDescriptor item(uninterrupted(
+        [&] { return openat(place.directory(), place.name.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC); }));
     if (!item) return lastError(path);
     // Asked before as well: what could not be told afterwards is better not moved. And the library takes ".."
     // off a path by its text, which leads elsewhere behind a link; the kernel's path has none.

@@ -3,11 +3,11 @@
 
 #include <string>
 
-#include "files/file_manager.h"
+#include "files/posix.h"
 
 namespace pinwell::files {
 
 /// As FileManager::trashItem: the path that the item has in the trash.
-Result<std::string> moveToTrash(const std::string& path);
+Result<std::string> moveToTrash(const Place& place);
 
 }  // namespace pinwell::files

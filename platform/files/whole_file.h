@@ -1,17 +1,15 @@
 // Files read and written whole. For this folder only.
 #pragma once
 
-#include <string>
-
-#include "files/file_manager.h"
+#include "files/posix.h"
 
 namespace pinwell::files {
 
 /// As FileManager::contentsOfFile.
-Result<Data> readWholeFile(const std::string& path);
+Result<Data> readWholeFile(const Place& place);
 
 /// As FileManager::writeFile. Atomically, the new file is on stable storage before it gets its name.
-Result<void> writeFileAtomically(ByteView contents, const std::string& path);
-Result<void> writeFilePlainly(ByteView contents, const std::string& path);
+Result<void> writeFileAtomically(ByteView contents, const Place& place);
+Result<void> writeFilePlainly(ByteView contents, const Place& place);
 
 }  // namespace pinwell::files

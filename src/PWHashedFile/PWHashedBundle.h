@@ -11,7 +11,7 @@ namespace pinwell {
 
 class PWHashedBundle : public PWHashedFile {
   public:
-    /// No file access.
+    /// Reads nothing of the bundle, and only holds it.
     using PWHashedFile::PWHashedFile;
 
     /// Where the ticket is, or would be.

@@ -4,15 +4,20 @@
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
-#include "src/PWHashedFile/file_kind.h"
 #include "src/messages.h"
 
 namespace pinwell {
 
 PWHashedFile::PWHashedFile(std::optional<URL> fileURL, const Platform& platform)
-    : fileURL_(std::move(fileURL)), platform_(platform) {}
+    : fileURL_(std::move(fileURL)), platform_(platform) {
+    // Before a kind reads anything. What cannot be held is not there, as the first question about it says.
+    if (fileURL_) held_ = platform.files.holdItem(*fileURL_).asOptional().value_or(nullptr);
+}
 
-std::shared_ptr<PWHashedFile> PWHashedFile::initWithFileURL(const URL& fileURL, const Platform& platform) {
+std::shared_ptr<PWHashedFile> PWHashedFile::initWithFileURL(const URL& fileURL, const Platform& platform,
+                                                            const BeforeReading& beforeReading) {
+    // From the first question on, and handed over to the object.
+    const auto held = platform.files.holdItem(fileURL);
     const auto properties = platform.files.resourceProperties(fileURL);
     if (!properties) {
         MessageLog("File %@ does not exist. %@", fileURL.path(), properties.error());
@@ -23,20 +28,35 @@ std::shared_ptr<PWHashedFile> PWHashedFile::initWithFileURL(const URL& fileURL, 
     MessageLog("Processing: %@", fileURL.path());
     NoisyLog("Properties are %@", properties->dictionary());
 
-    switch (assessmentClassForUTI(platform.types, properties->typeIdentifier, fileURL.pathExtension())) {
-        case AssessmentClass::bundle:
-            return std::make_shared<PWHashedBundle>(fileURL, platform);
+    AssessmentClass kind =
+        assessmentClassForUTI(platform.types, properties->typeIdentifier, fileURL.pathExtension());
+    if (kind == AssessmentClass::unknown && properties->isDirectory &&
+        platform.files.mainExecutableOfBundle(fileURL))
+        kind = AssessmentClass::bundle;
+    if (kind == AssessmentClass::unknown) {
+        MessageLog("Pinwell is incapable of working with %@ files.", properties->localizedTypeDescription);
+        return nullptr;
+    }
+    if (beforeReading && !beforeReading()) {
+        auto busy = std::make_shared<PWHashedFile>(fileURL, platform);
+        busy->setAppropriateExitCode(kExitCannotCreate);
+        return busy;
+    }
+    return ofKind(kind, fileURL, platform);
+}
+
+std::shared_ptr<PWHashedFile> PWHashedFile::ofKind(AssessmentClass kind, const URL& fileURL,
+                                                   const Platform& platform) {
+    switch (kind) {
         case AssessmentClass::diskImage:
             return std::make_shared<PWHashedDiskImage>(fileURL, platform);
         case AssessmentClass::package:
             return std::make_shared<PWHashedFlatPackage>(fileURL, platform);
+        case AssessmentClass::bundle:
         case AssessmentClass::unknown:
-            if (properties->isDirectory && platform.files.mainExecutableOfBundle(fileURL))
-                return std::make_shared<PWHashedBundle>(fileURL, platform);
             break;
     }
-    MessageLog("Pinwell is incapable of working with %@ files.", properties->localizedTypeDescription);
-    return nullptr;
+    return std::make_shared<PWHashedBundle>(fileURL, platform);
 }
 
 std::optional<Data> PWHashedFile::cached(std::optional<Data>& cache,

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -12,6 +13,7 @@
 
 #include "foundation/error.h"
 #include "foundation/url.h"
+#include "src/PWHashedFile/file_kind.h"
 #include "src/platform.h"
 
 namespace pinwell {
@@ -40,12 +42,19 @@ class InternalInconsistency : public std::logic_error {
 
 /// The common model of an artefact, and the factory of the concrete kinds. Kinds override the three hooks.
 ///
+/// An object holds its artefact (files::FileManager::holdItem): all that is read and written for it, by it
+/// and by a later object of the same path that is made while it lives, is found from one descriptor.
+///
 /// The two lazy accessors may be called from any thread; everything else belongs to the run's single flow.
 class PWHashedFile {
   public:
     /// A hashed file of the right kind; the base object with exit code 66 when the file cannot be read; null
     /// when its kind is unsupported. `platform`'s services must outlive the object.
-    static std::shared_ptr<PWHashedFile> initWithFileURL(const URL& fileURL, const Platform& platform);
+    /// `beforeReading`, if given, is
+    /// called when the kind is known and nothing has been read; false ends it with exit code 73.
+    using BeforeReading = std::function<bool()>;
+    static std::shared_ptr<PWHashedFile> initWithFileURL(const URL& fileURL, const Platform& platform,
+                                                         const BeforeReading& beforeReading = {});
 
     PWHashedFile(std::optional<URL> fileURL, const Platform& platform);
     virtual ~PWHashedFile() = default;
@@ -124,6 +133,8 @@ class PWHashedFile {
     void noteState();
 
   private:
+    static std::shared_ptr<PWHashedFile> ofKind(AssessmentClass kind, const URL& fileURL,
+                                                const Platform& platform);
     [[noreturn]] void mustOverride(std::string_view operation) const;
     std::optional<Data> cached(std::optional<Data>& cache, std::optional<Data> (PWHashedFile::*hook)());
     std::optional<URL> makeWorkingCopy();
@@ -135,6 +146,7 @@ class PWHashedFile {
     std::uint32_t digestAlgorithm_ = 0;
     std::optional<URL> fileURL_;
     Platform platform_;
+    foundation::Anchor held_;
     std::optional<foundation::Result<files::ItemState>> stateWhenRead_;
 
     std::recursive_mutex mutex_;

@@ -92,8 +92,9 @@ int ToolRun::validate(const std::string& path, const std::string& answer) {
     return run(path, answer, kOperationValidate);
 }
 
-int ToolRun::staple(const std::string& path, const std::string& answer) {
-    return run(path, answer, kOperationStaple);
+int ToolRun::staple(const std::string& path, const std::string& answer,
+                    const std::function<void()>& meanwhile) {
+    return run(path, answer, kOperationStaple, meanwhile);
 }
 
 bool ToolRun::passesOffline(const std::string& path) {
@@ -102,9 +103,10 @@ bool ToolRun::passesOffline(const std::string& path) {
     return file != nullptr && DownloadDelegate(file, services_).isExistingTicketValid();
 }
 
-int ToolRun::run(const std::string& path, const std::string& answer, std::uint8_t operation) {
+int ToolRun::run(const std::string& path, const std::string& answer, std::uint8_t operation,
+                 const std::function<void()>& meanwhile) {
     const MessageCapture output(kVerbosityNormal);
-    return statusOfRun(operation, URL::fileURLWithPath(path), platform_, services_, answer);
+    return statusOfRun(operation, URL::fileURLWithPath(path), platform_, services_, answer, meanwhile);
 }
 
 }  // namespace pinwell::test

@@ -55,13 +55,16 @@ class ToolRun {
     std::string path(const std::string& name) const { return platform_.directory / name; }
 
     int validate(const std::string& path, const std::string& answer);
-    int staple(const std::string& path, const std::string& answer);
+    /// `meanwhile` happens while the service is asked.
+    int staple(const std::string& path, const std::string& answer,
+               const std::function<void()>& meanwhile = {});
 
     /// Whether the ticket on it passes the check that is made before the network is asked.
     bool passesOffline(const std::string& path);
 
   private:
-    int run(const std::string& path, const std::string& answer, std::uint8_t operation);
+    int run(const std::string& path, const std::string& answer, std::uint8_t operation,
+            const std::function<void()>& meanwhile = {});
 
     TestPlatform platform_;
     std::unique_ptr<codesign::CodeSigningService> codeSigning_;

@@ -22,8 +22,9 @@ std::shared_ptr<PWHashedFile> makeSignedBundle(TestPlatform& platform) {
 }  // namespace
 
 int statusOfRun(std::uint8_t operation, const foundation::URL& path, TestPlatform& platform,
-                const Platform& services, std::string_view answer) {
+                const Platform& services, std::string_view answer, const std::function<void()>& meanwhile) {
     const auto answerLookup = [&] {
+        if (meanwhile) meanwhile();
         const https::HTTPResponse response{*foundation::URL::fromString("https://api.lumora.example/"),
                                            200,
                                            {{"X-Ostrel-Request-UUID", "REQUEST"}}};

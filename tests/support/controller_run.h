@@ -1,6 +1,7 @@
 // One run of the controller over a bundle, with the test in the place of the network.
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -11,9 +12,11 @@
 namespace pinwell::test {
 
 /// What a run of the tool ends with that finds this body in the answer to its lookup, if it asks. The
-/// services are of that platform, but for those that the test has replaced.
+/// services are of that platform, but for those that the test has replaced. `meanwhile` happens between
+/// question and answer.
 int statusOfRun(std::uint8_t operation, const foundation::URL& path, TestPlatform& platform,
-                const Platform& services, std::string_view answer);
+                const Platform& services, std::string_view answer,
+                const std::function<void()>& meanwhile = {});
 
 /// A bundle App.app whose cdhash is 20 bytes of 0xAB under algorithm 2, and a controller for it.
 class ControllerRun {

@@ -5,10 +5,13 @@
 #include <sys/file.h>
 #include <sys/ioctl.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <sys/types.h>
+#include <sys/vfs.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <cstdarg>
 #include <ctime>
@@ -25,8 +28,8 @@ constexpr std::size_t kShortCount = 3;
 // The calls that POSIX lets a signal interrupt.
 const std::set<std::string>& interruptible() {
     static const std::set<std::string> calls{
-        "open",  "openat",    "mkostemp", "close",  "read",  "write",           "pread", "pwrite",
-        "fsync", "ftruncate", "fchmod",   "fchown", "ioctl", "copy_file_range", "flock", "fallocate"};
+        "open",  "openat",    "openat2", "close",  "read",  "write",           "pread", "pwrite",
+        "fsync", "ftruncate", "fchmod",  "fchown", "ioctl", "copy_file_range", "flock", "fallocate"};
     return calls;
 }
 
@@ -181,7 +184,11 @@ PINWELL_WRAP(int, -1, ftruncate, (int file, off_t length), (file, length))
 PINWELL_WRAP(int, -1, futimens, (int file, const timespec* times), (file, times))
 PINWELL_WRAP(off_t, -1, lseek, (int file, off_t distance, int from), (file, distance, from))
 PINWELL_WRAP(int, -1, lstat, (const char* path, struct stat* status), (path, status))
-PINWELL_WRAP(char*, nullptr, mkdtemp, (char* pattern), (pattern))
+PINWELL_WRAP(int, -1, fstatat, (int directory, const char* name, struct stat* status, int flags),
+             (directory, name, status, flags))
+PINWELL_WRAP(int, -1, fstatfs, (int file, struct statfs* status), (file, status))
+PINWELL_WRAP(int, -1, mkdirat, (int directory, const char* name, mode_t mode), (directory, name, mode))
+PINWELL_WRAP(int, -1, renameat, (int from, const char* old, int to, const char* name), (from, old, to, name))
 PINWELL_WRAP(dirent*, nullptr, readdir, (DIR * stream), (stream))
 PINWELL_WRAP(ssize_t, -1, readlink, (const char* path, char* target, size_t size), (path, target, size))
 PINWELL_WRAP(int, -1, rename, (const char* from, const char* to), (from, to))
@@ -230,13 +237,6 @@ int __wrap_fsync(int file) {
     return answer;
 }
 
-int __real_mkostemp(char* pattern, int flags);
-int __wrap_mkostemp(char* pattern, int flags);
-int __wrap_mkostemp(char* pattern, int flags) {
-    noteOpening(flags);
-    return fails("mkostemp") ? -1 : __real_mkostemp(pattern, flags);
-}
-
 int __real_open(const char* path, int flags, ...);
 int __wrap_open(const char* path, int flags, ...);
 int __wrap_open(const char* path, int flags, ...) {
@@ -265,6 +265,27 @@ int __wrap_openat(int directory, const char* path, int flags, ...) {
     va_end(arguments);
     noteOpening(flags);
     return fails("openat") ? -1 : __real_openat(directory, path, flags, mode);
+}
+
+// As with open.
+int __real___openat_2(int directory, const char* path, int flags);
+int __wrap___openat_2(int directory, const char* path, int flags);
+int __wrap___openat_2(int directory, const char* path, int flags) {
+    noteOpening(flags);
+    return fails("openat") ? -1 : __real___openat_2(directory, path, flags);
+}
+
+// For calls that the C library has no function for; of these, openat2 concerns files.
+long __real_syscall(long number, ...);
+long __wrap_syscall(long number, ...);
+long __wrap_syscall(long number, ...) {
+    va_list arguments;
+    va_start(arguments, number);
+    std::array<long, 6> words{};
+    for (long& word : words) word = va_arg(arguments, long);
+    va_end(arguments);
+    if (number == SYS_openat2 && fails("openat2")) return -1;
+    return __real_syscall(number, words[0], words[1], words[2], words[3], words[4], words[5]);
 }
 
 // Every request that the file service makes takes one word, a number or a pointer.

@@ -221,9 +221,14 @@ Result<files::ItemState> RecordingFileManager::stateOfItem(const URL& item) {
     return real_->stateOfItem(item);
 }
 
-Result<std::unique_ptr<files::ItemLock>> RecordingFileManager::lockItem(const URL& item) {
+Result<std::unique_ptr<files::ItemLock>> RecordingFileManager::lockItem(
+    const URL& item, const std::function<void()>& waiting) {
     if (auto failure = record_->note("lockItem", item.path())) return *failure;
-    return real_->lockItem(item);
+    return real_->lockItem(item, waiting);
+}
+
+Result<foundation::Anchor> RecordingFileManager::holdItem(const URL& item) {
+    return real_->holdItem(item);
 }
 
 std::optional<URL> RecordingFileManager::mainExecutableOfBundle(const URL& directory) {

@@ -69,7 +69,10 @@ class RecordingFileManager final : public files::FileManager {
     files::Result<files::ResourceProperties> resourceProperties(const files::URL& item) override;
     files::Result<bool> isRegularFile(const files::URL& item) override;
     files::Result<files::ItemState> stateOfItem(const files::URL& item) override;
-    files::Result<std::unique_ptr<files::ItemLock>> lockItem(const files::URL& item) override;
+    files::Result<std::unique_ptr<files::ItemLock>> lockItem(const files::URL& item,
+                                                             const std::function<void()>& waiting) override;
+    /// Not written down: nothing is asked or changed by it.
+    files::Result<foundation::Anchor> holdItem(const files::URL& item) override;
     std::optional<files::URL> mainExecutableOfBundle(const files::URL& directory) override;
     files::Result<bool> volumeSupportsCloning(const files::URL& item) override;
     files::Result<files::URL> createReplacementDirectory(const files::URL& item) override;

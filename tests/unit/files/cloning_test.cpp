@@ -1,3 +1,5 @@
+#include <filesystem>
+
 #include "fixture.h"
 #include "support/volume.h"
 
@@ -75,11 +77,37 @@ TEST_F(Cloning, CannotBeAskedOfAFileThatMayNotBeRead) {
     EXPECT_THAT(manager->volumeSupportsCloning(url("file")), FailsWith(EACCES, path("file")));
 }
 
-TEST_F(Cloning, CannotBeAskedInADirectoryThatMayNotBeWritten) {
-    const AsOrdinaryUser user(directory.path());
-    writeFile(path("folder/file"), "contents");
-    setMode(path("folder"), 0500);
-    EXPECT_THAT(manager->volumeSupportsCloning(url("folder/file")), FailsWith(EACCES, path("folder")));
+// Asking makes nothing, so that the run goes on to find that it cannot make a directory there.
+TEST_F(Cloning, IsAskedInADirectoryThatMayNotBeWritten) {
+    const Volume volume("xfs");
+    if (volume.missing()) GTEST_SKIP() << *volume.missing();
+    writeFile(volume / "folder/file", irregularBytes(5000));
+    setMode(std::filesystem::path(volume.path()).parent_path(), 0755);
+    giveToOrdinaryUser(volume / "folder");
+    setMode(volume / "folder", 0500);
+    const AsOrdinaryUser user;
+    const auto file = URL::fileURLWithPath(volume / "folder/file");
+    const auto answer = manager->volumeSupportsCloning(file);
+    ASSERT_THAT(answer, Succeeds());
+    EXPECT_TRUE(*answer);
+    EXPECT_THAT(manager->createReplacementDirectory(file), FailsWith(EACCES, volume / "folder"));
+}
+
+// The kernel does not say what the file system could do with it; its directory still lets it be replaced.
+TEST_F(Cloning, IsAskedOfAnothersFileThatMayOnlyBeRead) {
+    const Volume volume("xfs");
+    if (volume.missing()) GTEST_SKIP() << *volume.missing();
+    if (!isSuperuser()) GTEST_SKIP() << "only the superuser can make another user's file";
+    makeDirectory(volume / "folder");
+    setMode(std::filesystem::path(volume.path()).parent_path(), 0755);
+    giveToOrdinaryUser(volume / "folder");
+    writeFile(volume / "folder/file", irregularBytes(5000));
+    setMode(volume / "folder/file", 0444);
+    const AsOrdinaryUser user;
+    const auto answer = manager->volumeSupportsCloning(URL::fileURLWithPath(volume / "folder/file"));
+    ASSERT_THAT(answer, Succeeds());
+    EXPECT_TRUE(*answer);
+    EXPECT_THAT(namesIn(volume / "folder"), ElementsAre("file"));
 }
 
 TEST_F(Cloning, CannotBeAskedOfWhatIsNoRegularFile) {

@@ -24,15 +24,19 @@ class Lock : public FilesTest {
   protected:
     Lock() { writeFile(path("file"), "contents"); }
 
+    static void silent() {}
+
     bool isLocked(std::string_view name) const {
         const foundation::FileDescriptor file(open(path(name).c_str(), O_RDONLY | O_CLOEXEC));
         return flock(file.get(), LOCK_EX | LOCK_NB) != 0 && errno == EWOULDBLOCK;
     }
+
+    foundation::Places places;
 };
 
 TEST_F(Lock, HoldsUntilItDies) {
     {
-        const auto lock = manager->lockItem(url("file"));
+        const auto lock = manager->lockItem(url("file"), silent);
         ASSERT_THAT(lock, Succeeds());
         EXPECT_TRUE(isLocked("file"));
     }
@@ -42,30 +46,48 @@ TEST_F(Lock, HoldsUntilItDies) {
 
 TEST_F(Lock, IsHadOnADirectoryToo) {
     makeDirectory(path("directory"));
-    const auto lock = manager->lockItem(url("directory"));
+    const auto lock = manager->lockItem(url("directory"), silent);
     ASSERT_THAT(lock, Succeeds());
     EXPECT_TRUE(isLocked("directory"));
 }
 
 TEST_F(Lock, ThatAnotherHoldsIsBusyWhenPatienceEnds) {
-    const auto first = lockPath(path("file"), 0ms);
+    const auto first = lockPath(places, path("file"), 0ms, silent);
     ASSERT_THAT(first, Succeeds());
-    EXPECT_THAT(lockPath(path("file"), 0ms), FailsWith(EBUSY, path("file")));
-    EXPECT_THAT(lockPath(path("file"), 30ms), FailsWith(EBUSY, path("file")));
+    EXPECT_THAT(lockPath(places, path("file"), 0ms, silent), FailsWith(EBUSY, path("file")));
+    EXPECT_THAT(lockPath(places, path("file"), 30ms, silent), FailsWith(EBUSY, path("file")));
+}
+
+TEST_F(Lock, SaysOnceThatItWaits) {
+    int said = 0;
+    const auto first = lockPath(places, path("file"), 0ms, [&] { ++said; });
+    EXPECT_EQ(said, 0);
+    EXPECT_THAT(lockPath(places, path("file"), 50ms, [&] { ++said; }), FailsWith(EBUSY, path("file")));
+    EXPECT_EQ(said, 1);
+}
+
+TEST_F(Lock, IsNotTakenWhereItWouldBlockOthers) {
+    // As linux/magic.h has them: SMB, CIFS and SMB2, also where the field is signed and of 32 bits.
+    for (const std::int64_t type : {std::int64_t{0x517B}, std::int64_t{0xFF534D42}, std::int64_t{0xFE534D42},
+                                    std::int64_t{static_cast<std::int32_t>(0xFF534D42)}})
+        EXPECT_TRUE(files::hasMandatoryLocks(type)) << std::hex << type;
+    // ext2 to ext4, XFS, btrfs, tmpfs, NFS.
+    for (const std::int64_t type : {0xEF53LL, 0x58465342LL, 0x9123683ELL, 0x01021994LL, 0x6969LL})
+        EXPECT_FALSE(files::hasMandatoryLocks(type)) << std::hex << type;
 }
 
 TEST_F(Lock, IsHadWhenTheOtherLetsGo) {
-    auto first = lockPath(path("file"), 0ms);
+    auto first = lockPath(places, path("file"), 0ms, silent);
     ASSERT_THAT(first, Succeeds());
-    auto second = std::async(std::launch::async, [&] { return manager->lockItem(url("file")); });
+    auto second = std::async(std::launch::async, [&] { return manager->lockItem(url("file"), silent); });
     first = foundation::Error::posix(ECANCELED);
     ASSERT_THAT(second.get(), Succeeds());
 }
 
 TEST_F(Lock, IsOnTheFileThatThePathNamesOnceItIsHad) {
-    auto first = lockPath(path("file"), 0ms);
+    auto first = lockPath(places, path("file"), 0ms, silent);
     ASSERT_THAT(first, Succeeds());
-    auto second = std::async(std::launch::async, [&] { return manager->lockItem(url("file")); });
+    auto second = std::async(std::launch::async, [&] { return manager->lockItem(url("file"), silent); });
     writeFile(path("other"), "new");
     std::filesystem::rename(path("other"), path("file"));
     first = foundation::Error::posix(ECANCELED);
@@ -77,9 +99,9 @@ TEST_F(Lock, IsOnTheFileThatThePathNamesOnceItIsHad) {
 TEST_F(Lock, IsRefusedWhereThereIsNothingToLock) {
     makeFifo(path("fifo"));
     makeLink("file", path("link"));
-    EXPECT_THAT(manager->lockItem(url("none")), FailsWith(ENOENT, path("none")));
-    EXPECT_THAT(manager->lockItem(url("fifo")), FailsWith(EINVAL, path("fifo")));
-    EXPECT_THAT(manager->lockItem(url("link")), FailsWith(ELOOP, path("link")));
+    EXPECT_THAT(manager->lockItem(url("none"), silent), FailsWith(ENOENT, path("none")));
+    EXPECT_THAT(manager->lockItem(url("fifo"), silent), FailsWith(EINVAL, path("fifo")));
+    EXPECT_THAT(manager->lockItem(url("link"), silent), FailsWith(ELOOP, path("link")));
 }
 
 class State : public FilesTest {
@@ -121,6 +143,14 @@ TEST_F(State, TellsAnotherFileInItsPlace) {
     writeFile(path("other"), "contents");
     std::filesystem::rename(path("other"), path("file"));
     EXPECT_NE(state(), before);
+}
+
+TEST_F(State, DoesNotCountModeLinksAndAttributes) {
+    const auto before = state();
+    setMode(path("file"), 0400);
+    std::filesystem::create_hard_link(path("file"), path("second name"));
+    setAttribute(path("file"), "user.note", "read");
+    EXPECT_EQ(state(), before);
 }
 
 TEST_F(State, TellsTimesANanosecondApart) {

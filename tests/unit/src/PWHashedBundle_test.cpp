@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 
+#include <cerrno>
 #include <filesystem>
 
 #include "foundation/process.h"
@@ -222,6 +223,83 @@ TEST_F(Bundle, DeletingThroughTheBaseRaisesSinceNoWriteHookIsOverridden) {
                      "PWHashedBundle subclass");
     }
     EXPECT_EQ(test::readFile(ticketPath()), "OLD");
+}
+
+// A bundle whose directories lead, or are made to lead, into another one.
+class LinkedBundle : public Bundle {
+  protected:
+    LinkedBundle() {
+        test::writeFile(otherTicket(), std::string_view("THE OTHER'S TICKET"));
+        test::writeFile(platform.directory / "Other.app/Contents/MacOS/App", std::string_view("other"));
+        found.emplace(platform.directory.url("App.app"), platform.services());
+    }
+
+    std::string contents() const { return platform.directory / "App.app/Contents"; }
+    std::string otherTicket() const { return platform.directory / "Other.app/Contents/CodeResources"; }
+
+    void linkContents(const std::string& target) const {
+        std::filesystem::rename(contents(), platform.directory / "App.app/Moved");
+        std::filesystem::create_directory_symlink(target, contents());
+    }
+
+    // Fails with the message of a ticket that is in the way, and leaves the other bundle as it was.
+    void expectNothingIsWritten() {
+        std::optional<Error> error;
+        const MessageCapture output(kVerbosityVerbose);
+        EXPECT_FALSE(found->writeNewTicketDataFromURL(source(), &error));
+        EXPECT_EQ(output.text().find("Could not remove existing ticket from " + ticketURL().absoluteString() +
+                                     " because an error occurred. "),
+                  0U)
+            << output.text();
+        EXPECT_EQ(found->appropriateExitCode(), 73);
+        ASSERT_TRUE(error.has_value());
+        EXPECT_EQ(error->code(), EXDEV);
+        EXPECT_EQ(test::readFile(otherTicket()), "THE OTHER'S TICKET");
+    }
+
+    // A later object of the same path.
+    PWHashedBundle again() { return {platform.directory.url("App.app"), platform.services()}; }
+
+    std::optional<PWHashedBundle> found;  // made when the bundle is there, which it holds
+};
+
+TEST_F(LinkedBundle, HasNoTicketBehindALinkThatLeadsOut) {
+    for (const std::string& target :
+         {std::string("../Other.app/Contents"), platform.directory / "Other.app/Contents"}) {
+        linkContents(target);
+        EXPECT_EQ(again().ticketData(), std::nullopt) << target;
+        std::filesystem::remove(contents());
+        std::filesystem::rename(platform.directory / "App.app/Moved", contents());
+    }
+}
+
+TEST_F(LinkedBundle, IsNotWrittenThroughALinkThatLeadsOut) {
+    linkContents("../Other.app/Contents");
+    expectNothingIsWritten();
+}
+
+TEST_F(LinkedBundle, IsNotWrittenThroughALinkThatTakesTheDirectorysPlaceMeanwhile) {
+    EXPECT_TRUE(found->cdHash());
+    EXPECT_EQ(found->ticketData(), std::nullopt);
+    linkContents(platform.directory / "Other.app/Contents");
+    expectNothingIsWritten();
+}
+
+TEST_F(LinkedBundle, IsWrittenThroughALinkThatStaysInIt) {
+    linkContents("Moved");
+    EXPECT_TRUE(found->writeNewTicketDataFromURL(source(), nullptr));
+    EXPECT_EQ(test::readFile(platform.directory / "App.app/Moved/CodeResources"), "NEW TICKET");
+}
+
+TEST_F(LinkedBundle, IsWrittenAsItWasFoundWhenAnotherTakesItsPlaceMeanwhile) {
+    std::filesystem::rename(platform.directory / "App.app", platform.directory / "Found.app");
+    std::filesystem::rename(platform.directory / "Other.app", platform.directory / "App.app");
+    EXPECT_TRUE(found->writeNewTicketDataFromURL(source(), nullptr));
+    EXPECT_EQ(test::readFile(platform.directory / "Found.app/Contents/CodeResources"), "NEW TICKET");
+    EXPECT_EQ(test::readFile(ticketPath()), "THE OTHER'S TICKET");
+
+    // Whoever reads it back while it is held reads what was written.
+    EXPECT_EQ(again().ticketData(), foundation::toData(std::string_view("NEW TICKET")));
 }
 
 }  // namespace

@@ -1,8 +1,11 @@
 // Tickets that are fetched as an asset of their own.
+#include <fcntl.h>
 #include <gtest/gtest.h>
+#include <sys/file.h>
 
 #include <cerrno>
 #include <filesystem>
+#include <utility>
 
 #include "src/messages.h"
 #include "support/controller_run.h"
@@ -219,6 +222,27 @@ TEST_F(LargeTicket, CompletionWithoutAnErrorDoesNothing) {
     run.controller.didComplete(*session, *session->downloadTasks.at(0), std::nullopt);
     EXPECT_EQ(output.text(), "");
     EXPECT_EQ(run.file->appropriateExitCode(), 42);
+}
+
+TEST_F(LargeTicket, ThatFailsToDownloadGivesTheLockUp) {
+    const auto isLocked = [&] {
+        const foundation::FileDescriptor other(open(run.artefact().c_str(), O_RDONLY | O_CLOEXEC));
+        return flock(other.get(), LOCK_EX | LOCK_NB) != 0 && errno == EWOULDBLOCK;
+    };
+    auto lock = run.platform.files.lockItem(URL::fileURLWithPath(run.artefact()), [] {});
+    ASSERT_TRUE(lock.has_value());
+    run.controller.keepLock(*std::move(lock));
+    start("https://assets.example/${f}");
+    const auto session = run.platform.https.sessions.back();
+    const auto task = session->downloadTasks.at(0);
+
+    run.controller.didComplete(*session, *task, std::nullopt);
+    EXPECT_TRUE(isLocked());
+
+    const MessageCapture output(kVerbosityQuiet);
+    run.controller.didComplete(*session, *task,
+                               Error(std::string(foundation::kURLErrorDomain), 1, "cut off"));
+    EXPECT_FALSE(isLocked());
 }
 
 }  // namespace

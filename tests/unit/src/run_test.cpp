@@ -1,10 +1,14 @@
 // How a run ends: with an exit status of its own, or with its controller's.
 #include "src/run.h"
 
+#include <fcntl.h>
 #include <gmock/gmock.h>
+#include <sys/file.h>
 
 #include <cerrno>
+#include <chrono>
 #include <filesystem>
+#include <thread>
 
 #include "src/DownloadDelegate.h"
 #include "support/controller_run.h"
@@ -59,10 +63,50 @@ TEST_F(Run, OfAKindThatIsNotSupportedEndsWith66) {
 TEST_F(Run, ThatStaplesWhatAnotherKeepsLockedEndsWith73BeforeItReadsAnything) {
     platform.files.fail("lockItem", EBUSY);
     EXPECT_EQ(staple(), kExitCannotCreate);
-    EXPECT_THAT(output.lines(), ElementsAre("Another process keeps " + made.artefact() +
-                                            " locked. Nothing was written to it."));
-    EXPECT_THAT(platform.files.names(), ElementsAre("lockItem"));
+    EXPECT_THAT(output.lines(),
+                ElementsAre("Processing: " + made.artefact(), "Another process keeps " + made.artefact() +
+                                                                  " locked. Nothing was written to it."));
+    EXPECT_THAT(platform.files.names(), ElementsAre("resourceProperties", "lockItem"));
     EXPECT_EQ(waits, 0);
+}
+
+TEST_F(Run, LocksNothingOfAKindThatIsNotSupported) {
+    writeFile(platform.directory / "notes.txt", std::string_view("text"));
+    platform.files.fail("lockItem", EBUSY);
+    EXPECT_EQ(operate(kOperationStaple, platform.directory / "notes.txt"), kExitNoInput);
+    EXPECT_THAT(output.lines(), Contains(StartsWith("Pinwell is incapable of working with ")));
+    EXPECT_EQ(platform.files.count("lockItem"), 0U);
+}
+
+TEST_F(Run, LocksNothingThatIsNotThere) {
+    EXPECT_EQ(operate(kOperationStaple, platform.directory / "none"), kExitNoInput);
+    EXPECT_EQ(platform.files.count("lockItem"), 0U);
+}
+
+bool isLocked(const std::string& path) {
+    const foundation::FileDescriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+    return flock(file.get(), LOCK_EX | LOCK_NB) != 0 && errno == EWOULDBLOCK;
+}
+
+TEST_F(Run, LocksTheArtefactWhileItWaits) {
+    bool locked = false;
+    runOperation(kOperationStaple, URL::fileURLWithPath(made.artefact()), platform.services(),
+                 [&] { locked = isLocked(made.artefact()); });
+    EXPECT_TRUE(locked);
+}
+
+TEST_F(Run, SaysInItsVerboseOutputThatItWaitsForALock) {
+    const MessageCapture verbose(kVerbosityVerbose);
+    const foundation::FileDescriptor other(open(made.artefact().c_str(), O_RDONLY | O_CLOEXEC));
+    ASSERT_EQ(flock(other.get(), LOCK_EX), 0);
+    std::thread release([&] {
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+        flock(other.get(), LOCK_UN);
+    });
+    EXPECT_EQ(staple(), kExitOK);
+    release.join();
+    EXPECT_THAT(verbose.lines(),
+                Contains("Waiting for another process that keeps " + made.artefact() + " locked."));
 }
 
 TEST_F(Run, ThatStaplesGoesOnWhereNothingCanBeLocked) {
