@@ -9,8 +9,7 @@
 namespace pinwell::companion {
 namespace {
 
-bool isSet(const char* name) {
-    const char* const value = std::getenv(name);
+bool isSet(const char* value) {
     return value != nullptr && *value != '\0';
 }
 
@@ -24,8 +23,9 @@ ColorWhen colorWhenNamed(std::string_view name) noexcept {
 
 bool wantsColor(ColorWhen when, int descriptor) {
     if (when != ColorWhen::automatic) return when == ColorWhen::always;
-    if (isSet("NO_COLOR")) return false;
-    if (isSet("CLICOLOR_FORCE") && std::string_view(std::getenv("CLICOLOR_FORCE")) != "0") return true;
+    const char* const force = std::getenv("CLICOLOR_FORCE");
+    if (isSet(std::getenv("NO_COLOR"))) return false;
+    if (isSet(force) && std::string_view(force) != "0") return true;
     const char* const terminal = std::getenv("TERM");
     const bool isDumb = terminal != nullptr && std::string_view(terminal) == "dumb";
     return ::isatty(descriptor) == 1 && !isDumb;

@@ -12,8 +12,8 @@ namespace pinwell {
 
 /// Takes the lock of an artefact that is about to be stapled into `lock`, and waits for it, which the verbose
 /// output says. To be called when the kind is known and nothing has been read
-/// (PWHashedFile::BeforeReading). Returns false, and says so, only if another process holds it. Without a lock
-/// (the file system knows none, or its locks would block others) the run goes on: every write checks the
+/// (PWHashedFile::BeforeReading). Returns false, and says so, only if another process holds it. Without a
+/// lock (the file system knows none, or its locks would block others) the run goes on: every write checks the
 /// file's state again.
 bool lockArtefact(const Platform& platform, const foundation::URL& path,
                   std::unique_ptr<files::ItemLock>& lock);

@@ -248,8 +248,12 @@ class ArchiveTableReader::Document final : public foundation::XMLEvents {
 
     void endData(bool isAttribute) {
         if (!described_.saysAnything) return;
-        ArchivedData data{
-            .file = around_.back(), .isAttribute = isAttribute, .range = {}, .algorithm = {}, .checksum = {}, .problem = {}};
+        ArchivedData data{.file = around_.back(),
+                          .isAttribute = isAttribute,
+                          .range = {},
+                          .algorithm = {},
+                          .checksum = {},
+                          .problem = {}};
         const std::optional<FileRange> range = described_.range();
         if (!range) {
             data.problem = "the table does not say once where it is";

@@ -12,8 +12,8 @@ namespace pinwell::foundation {
 
 inline constexpr std::string_view kBinaryPropertyListMagic = "bplist00";
 
-/// Most bytes that text and data of a binary list may come to when shared objects are counted at every use: as
-/// many as the longest list can hold without sharing any.
+/// Most bytes that text and data of a binary list may come to when shared objects are counted at every use:
+/// as many as the longest list can hold without sharing any.
 inline constexpr std::uint64_t kMaximumPropertyListContents = 16 * 1024 * 1024;
 
 /// A list is refused. `code` is kMalformedDocument or kExcessiveDocument.

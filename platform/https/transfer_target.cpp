@@ -1,8 +1,11 @@
 #include "https/transfer_target.h"
 
+#include <curl/curl.h>
+
 #include <algorithm>
 #include <string_view>
 
+#include "foundation/handle.h"
 #include "https/session.h"
 #include "https/transfer_error.h"
 
@@ -26,6 +29,10 @@ bool namesUser(std::string_view text) {
 }
 
 }  // namespace
+
+void AddressDeleter::operator()(Curl_URL* address) const noexcept {
+    curl_url_cleanup(address);
+}
 
 Result<Target> targetOf(const foundation::URL& url) {
     const std::string text = url.absoluteString();

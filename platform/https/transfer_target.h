@@ -1,17 +1,20 @@
 // The URL of an exchange as the transfer library understands it.
 #pragma once
 
-#include <curl/curl.h>
-
+#include <memory>
 #include <string>
 
 #include "foundation/error.h"
-#include "foundation/handle.h"
 #include "foundation/url.h"
+
+struct Curl_URL;
 
 namespace pinwell::https {
 
-using AddressHandle = foundation::Handle<CURLU, curl_url_cleanup>;
+struct AddressDeleter {
+    void operator()(Curl_URL* address) const noexcept;
+};
+using AddressHandle = std::unique_ptr<Curl_URL, AddressDeleter>;
 
 struct Target {
     AddressHandle address;

@@ -398,7 +398,7 @@ TEST_F(HostileAnswer, AReasonOfManyMebibytesIsPrintedInOneLine) {
 TEST_F(HostileAnswer, CannotDriveTheTerminalInVerboseModeEither) {
     Response response =
         answer(R"({"records":[{"reason":"\u001b[2J","a\u001b[2Jb":{"c":["\u009b\u0007\u202e\r\n"]}}]})");
-    response.headers.emplace_back("X-A\x1b", "\x1b[2J");
+    response.headers.emplace_back("X-A", "\x1b[2J");
     response.headers.emplace_back("X-B", "\x1b[2J\xc2\x9b");
     serve(response);
     const ProcessResult result = pinwell({"staple", "-v", bundle});

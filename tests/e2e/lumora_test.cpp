@@ -56,12 +56,12 @@ TEST_F(LocalService, FromASampleToItsRevocation) {
     EXPECT_EQ(stapled(), kept);
 }
 
-TEST_F(LocalService, ARevokedArtefactCanBeIssuedATicketAgain) {
+TEST_F(LocalService, ARevokedArtefactCanBeReinstated) {
     serveRecords();
     record("issue", {bundle});
     record("revoke", {bundle});
     EXPECT_THAT(staple(), RefusedAsRevoked());
-    record("issue", {bundle});
+    record("issue", {bundle, "--reinstate", "--comment", "a false alarm"});
     EXPECT_THAT(staple(), Stapled());
     EXPECT_THAT(validate(), Validated());
 }
