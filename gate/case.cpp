@@ -7,6 +7,7 @@
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
 #include "foundation/format.h"
+#include "foundation/places.h"
 #include "gate/policy.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
@@ -49,7 +50,7 @@ const char* nameOf(Kind kind) {
 
 bool isExecutableImage(const std::string& path) {
     try {
-        return codesign::isExecutableImage(codesign::FileSource(path));
+        return codesign::isExecutableImage(codesign::FileSource(foundation::Places(), path));
     } catch (const codesign::CodeError&) {
         return false;
     }
@@ -190,7 +191,7 @@ void Case::requireOneArtefact() {
 // The same file as was verified, as long as nobody changes it meanwhile.
 void Case::digestFile() {
     try {
-        const codesign::FileSource file(absolutePath_);
+        const codesign::FileSource file(foundation::Places(), absolutePath_);
         result_.fileDigest =
             foundation::toData(verify::digestOf(verify::Algorithm::sha256, file, {0, file.size()}));
     } catch (const codesign::CodeError& error) {

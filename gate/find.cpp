@@ -8,6 +8,7 @@
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
 #include "foundation/format.h"
+#include "foundation/places.h"
 #include "foundation/url.h"
 #include "src/PWHashedFile/file_kind.h"
 
@@ -19,7 +20,7 @@ namespace fs = std::filesystem;
 
 bool beginsAsExecutable(const std::string& path) {
     try {
-        return codesign::isExecutableImage(codesign::FileSource(path));
+        return codesign::isExecutableImage(codesign::FileSource(foundation::Places(), path));
     } catch (const codesign::CodeError&) {
         return false;
     }

@@ -2,8 +2,8 @@
 
 namespace pinwell::gate {
 
-std::string render(Format format, const std::vector<Result>& results) {
-    switch (format) {
+std::string render(Format kind, const std::vector<Result>& results) {
+    switch (kind) {
         case Format::text:
             return renderText(results);
         case Format::json:

@@ -2,6 +2,7 @@
 
 #include "codesign/code_error.h"
 #include "foundation/byte_reader.h"
+#include "foundation/places.h"
 #include "verify/bundle.h"
 #include "verify/check_names.h"
 #include "verify/disk_image.h"
@@ -16,13 +17,14 @@ VerifiedCode verified(const Subject& subject, Workers& workers, Section& root) {
         case Kind::bundle:
             return verifyBundle(subject.path, workers, root);
         case Kind::executable:
-            return verifyExecutable(codesign::FileSource(subject.path), {}, "executable", workers, root);
+            return verifyExecutable(codesign::FileSource(foundation::Places(), subject.path), {},
+                                    "executable", workers, root);
         case Kind::diskImage:
-            return verifyDiskImage(codesign::FileSource(subject.path), workers, root);
+            return verifyDiskImage(codesign::FileSource(foundation::Places(), subject.path), workers, root);
         case Kind::package:
             break;
     }
-    return verifyPackage(codesign::FileSource(subject.path), workers, root);
+    return verifyPackage(codesign::FileSource(foundation::Places(), subject.path), workers, root);
 }
 
 }  // namespace

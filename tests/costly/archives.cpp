@@ -227,7 +227,7 @@ std::vector<CostlyInput> archiveInputs() {
             [=](Length n) {
                 return filled([=](std::size_t i) { return "<f xmlns:n" + number(i) + "='u'>"; }, n);
             }),
-        row("NameSpacesOfOneElement", "name-space declarations of one element", false,
+        row("NameSpacesOfOneElement", "name-space declarations of one element", true,
             [=](Length n) {
                 return "<file" + filled([=](std::size_t i) { return " xmlns:n" + number(i) + "='u'"; }, n) +
                        "/>";
