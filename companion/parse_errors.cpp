@@ -21,6 +21,12 @@ std::vector<std::string> optionNames(const CLI::App& app) {
     for (const CLI::Option* option : app.get_options()) {
         for (const std::string& name : option->get_lnames()) names.push_back("--" + name);
     }
+    // A group of options is a command without a name.
+    for (const CLI::App* group :
+         app.get_subcommands([](const CLI::App* one) { return one->get_name().empty(); })) {
+        const std::vector<std::string> more = optionNames(*group);
+        names.insert(names.end(), more.begin(), more.end());
+    }
     return names;
 }
 

@@ -15,6 +15,8 @@
 #include <vector>
 
 #include "codesign/code_error.h"
+#include "companion/parse_errors.h"
+#include "companion/version.h"
 #include "foundation/format.h"
 #include "foundation/process.h"
 #include "gate/find.h"
@@ -238,14 +240,14 @@ int run(int argc, char** argv) {
     PolicyArguments policy;
     CLI::App app("Judges software that was received: its ticket, and every byte that was signed.",
                  "pinwell-gate");
-    app.set_version_flag("--version", "pinwell-gate " PINWELL_VERSION);
+    app.set_version_flag("--version", companion::versionText("pinwell-gate"));
     addOptions(app, options, policy);
     try {
         app.parse(argc, argv);
     } catch (const CLI::Success& request) {
         return app.exit(request);  // help, version
     } catch (const CLI::ParseError& error) {
-        complain(error.what());
+        complain(companion::describe(app, error));
         return EX_USAGE;
     }
     try {

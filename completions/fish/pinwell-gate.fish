@@ -1,0 +1,17 @@
+# Completion of pinwell-gate(1) for fish.
+
+complete -c pinwell-gate -l online -d 'Ask the record service, too'
+complete -c pinwell-gate -l offline -d 'Go by the stapled ticket alone'
+complete -c pinwell-gate -r -l tickets -d 'Take the tickets of today from files'
+complete -c pinwell-gate -l shallow -d 'Judge the tickets alone'
+complete -c pinwell-gate -s r -l recursive -d 'Judge every artefact in the directories'
+complete -c pinwell-gate -r -l policy -d 'Read the policy from a file'
+complete -c pinwell-gate -x -l max-ticket-age -d 'Refuse older tickets'
+complete -c pinwell-gate -x -l require-team -d 'Refuse code of other teams'
+complete -c pinwell-gate -x -l require-identifier -d 'Refuse code with other identifiers'
+complete -c pinwell-gate -l require-secure-timestamp -d 'Refuse code without a secure timestamp'
+complete -c pinwell-gate -x -l format -a 'text json sarif junit html' -d 'The form of the report'
+complete -c pinwell-gate -s o -r -l output -d 'Write the report to a file'
+complete -c pinwell-gate -r -l attest -d 'Write an in-toto statement'
+complete -c pinwell-gate -s h -l help -d 'Print the usage'
+complete -c pinwell-gate -l version -d 'Print the version'
