@@ -296,9 +296,9 @@ TEST_F(ChangingFile, ThatBecomesAnotherKindCannotBeReadBack) {
                                       stapleFailed(73))));
 }
 
-TEST_F(ChangingFile, ThatVanishesCannotBeWrittenTo) {
-    EXPECT_THAT(stapleWhile([&] { std::filesystem::rename(bundle, bundle + ".moved"); }),
-                Ended(73, ElementsAre(processing(), stapleFailed(73))));
+TEST_F(ChangingFile, ThatIsMovedAwayDoesNotValidateWhereItWas) {
+    const ProcessResult result = stapleWhile([&] { std::filesystem::rename(bundle, bundle + ".moved"); });
+    EXPECT_EQ(result.exitStatus, 73);
     EXPECT_FALSE(std::filesystem::exists(bundle));
 }
 
