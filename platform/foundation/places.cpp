@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <climits>
 #include <utility>
 
 #include "foundation/beneath.h"
@@ -106,6 +107,8 @@ Result<Anchor> Places::hold(const std::string& path) {
 }
 
 Result<Place> Places::find(const std::string& path) const {
+    // As the kernel does, which here sees parts of the path alone.
+    if (path.size() >= PATH_MAX) return Error::posix(ENAMETOOLONG, path);
     // Of several, the one that is nearest.
     Anchor from;
     for (Anchor& anchor : held())
