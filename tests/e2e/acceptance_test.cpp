@@ -297,8 +297,13 @@ TEST_F(ChangingFile, ThatBecomesAnotherKindCannotBeReadBack) {
 }
 
 TEST_F(ChangingFile, ThatIsMovedAwayDoesNotValidateWhereItWas) {
-    const ProcessResult result = stapleWhile([&] { std::filesystem::rename(bundle, bundle + ".moved"); });
-    EXPECT_EQ(result.exitStatus, 73);
+    EXPECT_THAT(
+        stapleWhile([&] { std::filesystem::rename(bundle, bundle + ".moved"); }),
+        Ended(73,
+              ElementsAre(processing(), processing(),
+                          "Although we wrote the ticket, the written data did not validate. Please restore " +
+                              bundle + " from backup to try again.",
+                          stapleFailed(73))));
     EXPECT_FALSE(std::filesystem::exists(bundle));
 }
 
