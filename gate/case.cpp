@@ -1,18 +1,15 @@
 #include "gate/case.h"
 
-#include <algorithm>
 #include <utility>
 
 #include "codesign/byte_source.h"
 #include "codesign/code_error.h"
-#include "codesign/executable_image.h"
 #include "foundation/format.h"
 #include "foundation/places.h"
 #include "gate/policy.h"
-#include "src/PWHashedFile/PWHashedBundle.h"
-#include "src/PWHashedFile/PWHashedDiskImage.h"
-#include "src/PWHashedFile/PWHashedFlatPackage.h"
+#include "inspect/gather_ticket.h"
 #include "src/ticket_record.h"
+#include "verify/artefact_kind.h"
 #include "verify/check_names.h"
 #include "verify/page_digest.h"
 
@@ -20,7 +17,7 @@ namespace pinwell::gate {
 
 using foundation::format;
 using foundation::URL;
-using verify::CodeIdentity;
+using verify::JudgedTicket;
 using verify::Kind;
 using verify::Outcome;
 
@@ -29,40 +26,12 @@ namespace {
 const std::string kStapledPlace = "stapled ticket";
 const std::string kServicePlace = "ticket of the record service";
 
-std::string reasonOf(const foundation::Error& error) {
-    const std::string& reason = error.localizedFailureReason();
-    return reason.empty() ? error.localizedDescription() : reason;
-}
-
-const char* nameOf(Kind kind) {
-    switch (kind) {
-        case Kind::bundle:
-            return "bundle";
-        case Kind::executable:
-            return "executable";
-        case Kind::diskImage:
-            return "diskImage";
-        case Kind::package:
-            break;
-    }
-    return "package";
-}
-
-bool isExecutableImage(const std::string& path) {
-    try {
-        return codesign::isExecutableImage(codesign::FileSource(foundation::Places(), path));
-    } catch (const codesign::CodeError&) {
-        return false;
-    }
-}
-
-/// The kind that the tool sees; `nullopt` for what it does not take, or takes for want of a better one.
-std::optional<Kind> kindOf(const PWHashedFile& file, bool isFile, const std::string& path) {
-    if (dynamic_cast<const PWHashedDiskImage*>(&file) != nullptr && isFile) return Kind::diskImage;
-    if (dynamic_cast<const PWHashedFlatPackage*>(&file) != nullptr && isFile) return Kind::package;
-    if (dynamic_cast<const PWHashedBundle*>(&file) == nullptr) return std::nullopt;
-    if (!isFile) return Kind::bundle;
-    return isExecutableImage(path) ? std::optional(Kind::executable) : std::nullopt;
+JudgedTicket judge(foundation::ByteView bytes, trust::TrustService& trust) {
+    return {bytes, trust, [&] {
+                const auto fault =
+                    inspect::firstFaultOf(inspect::gatherTicket(bytes, std::nullopt, std::nullopt, trust));
+                return fault ? fault->rule : "it is refused";
+            }};
 }
 
 }  // namespace
@@ -102,27 +71,15 @@ void Case::examine() {
 bool Case::open() {
     // A URL is made absolute with the working directory; a path is shown as it was given.
     const URL url = URL::fileURLWithPath(result_.path);
-    if (const auto properties = judgement_.platform.files.resourceProperties(url); !properties) {
-        unreadable("The path cannot be read: " + reasonOf(properties.error()) + ".");
+    verify::OpenedArtefact opened = verify::openArtefact(url, judgement_.platform);
+    if (opened.file == nullptr) {
+        unreadable(opened.problem);
         return false;
     }
-    const auto regular = judgement_.platform.files.isRegularFile(url);
-    const bool isFile = regular && *regular;
-    if (isFile) {
-        if (const auto opened = judgement_.platform.files.openForReading(url); !opened) {
-            unreadable("The file cannot be read: " + reasonOf(opened.error()) + ".");
-            return false;
-        }
-    }
-    file_ = PWHashedFile::initWithFileURL(url, judgement_.platform);
-    const auto kind = file_ ? kindOf(*file_, isFile, url.path()) : std::nullopt;
-    if (!kind) {
-        unreadable("This is of no kind that carries a ticket.");
-        return false;
-    }
-    kind_ = *kind;
+    file_ = std::move(opened.file);
+    kind_ = opened.kind;
     absolutePath_ = url.path();
-    result_.kind = nameOf(kind_);
+    result_.kind = verify::nameOf(kind_);
     return true;
 }
 
@@ -138,7 +95,7 @@ bool Case::judgeStapled() {
     const std::optional<foundation::Data> bytes = file_->ticketData();
     if (!bytes) return false;
     result_.checks.pass(verify::kTicketStapled, kStapledPlace, "a ticket");
-    stapled_.emplace(*bytes, judgement_.platform.trust);
+    stapled_ = judge(*bytes, judgement_.platform.trust);
     const bool isAcceptable = checkTicket(*stapled_, codeHash_, kStapledPlace, result_.checks);
     if (stapled_->isGenuine() && stapled_->isRevoked())
         atLeast(Verdict::revoked, "Its ticket revokes it: it must not run.");
@@ -151,7 +108,9 @@ void Case::verifyBytes() {
     verify::Report report = verify::verifyArtefact({kind_, absolutePath_}, judgement_.workers);
     code_ = std::move(report.code);
     hasCode_ = true;
-    requireOneArtefact();
+    // The tool has found the hash, and these checks the code: of two openings of one path.
+    if (!verify::checkOneArtefact(code_, codeHash_, result_.checks))
+        atLeast(Verdict::altered, "It changed while it was read.");
     const bool isSigned = code_.isSigned || codeHash_ || stapled_;
     if (!isSigned) {
         atLeast(Verdict::unreadable, "It has no signature.");
@@ -173,19 +132,6 @@ void Case::verifyBytes() {
         case Outcome::noted:
             break;
     }
-}
-
-// The tool has found the hash, and these checks the code: of two openings of one path.
-void Case::requireOneArtefact() {
-    if (!codeHash_ || code_.identities.empty()) return;
-    const bool isThere =
-        std::any_of(code_.identities.begin(), code_.identities.end(), [&](const CodeIdentity& identity) {
-            return !identity.isNested && identity.codeHashes.front() == *codeHash_;
-        });
-    if (isThere) return;
-    result_.checks.fail(verify::kArtefact, {}, foundation::toHex(*codeHash_),
-                        foundation::toHex(code_.identities.front().codeHashes.front()));
-    atLeast(Verdict::altered, "It changed while it was read.");
 }
 
 // The same file as was verified, as long as nobody changes it meanwhile.
@@ -238,7 +184,7 @@ void Case::takeFetched(const retrieval::FetchedTicket& fetched) {
 }
 
 void Case::takeCurrent(foundation::ByteView bytes, const std::string& place) {
-    current_.emplace(bytes, judgement_.platform.trust);
+    current_ = judge(bytes, judgement_.platform.trust);
     const bool isAcceptable = checkTicket(*current_, codeHash_, place, result_.checks);
     if (isAcceptable) {
         result_.checks.pass(verify::kTicketCurrent, place, "a ticket that accepts the artefact");
@@ -252,21 +198,11 @@ void Case::takeCurrent(foundation::ByteView bytes, const std::string& place) {
 // Whether somebody vouches for each piece of code: the ticket, or the seal of code that the ticket lists.
 void Case::checkListing() {
     if (!isStapledAcceptable_ || judgement_.options.isShallow) return;
-    for (const CodeIdentity& identity : code_.identities) {
-        const auto isListed = [&](const foundation::Data& hash) {
-            return stapled_->lists(hash) || (current_ && current_->lists(hash));
-        };
-        const std::string hash = foundation::toHex(identity.codeHashes.front());
-        if (std::any_of(identity.codeHashes.begin(), identity.codeHashes.end(), isListed)) {
-            result_.checks.pass(verify::kCodeListed, identity.place, hash);
-        } else if (identity.isSealed) {
-            result_.checks.note(verify::kCodeListed, identity.place, hash,
-                                "the ticket does not list it; the seal around it names it");
-        } else {
-            result_.checks.fail(verify::kCodeListed, identity.place, hash, "the ticket does not list it");
-            atLeast(Verdict::altered, "There is code in it that nobody vouches for.");
-        }
-    }
+    const auto lists = [&](foundation::ByteView hash) {
+        return stapled_->lists(hash) || (current_ && current_->lists(hash));
+    };
+    if (!verify::checkListing(code_, lists, result_.checks))
+        atLeast(Verdict::altered, "There is code in it that nobody vouches for.");
 }
 
 void Case::checkPolicy() {

@@ -12,11 +12,11 @@
 
 #include "gate/options.h"
 #include "gate/result.h"
-#include "gate/ticket.h"
 #include "gate/ticket_directory.h"
 #include "retrieval/ticket_fetch.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/platform.h"
+#include "verify/judged_ticket.h"
 #include "verify/verify.h"
 #include "verify/workers.h"
 
@@ -56,7 +56,6 @@ class Case {
     bool open();
     bool judgeStapled();
     void verifyBytes();
-    void requireOneArtefact();
     void digestFile();
     void lookInDirectory();
     void takeCurrent(foundation::ByteView bytes, const std::string& place);
@@ -71,8 +70,8 @@ class Case {
     verify::Kind kind_ = verify::Kind::bundle;
     std::string absolutePath_;
     std::optional<foundation::Data> codeHash_;
-    std::optional<JudgedTicket> stapled_;
-    std::optional<JudgedTicket> current_;  // of the service, or of the directory
+    std::optional<verify::JudgedTicket> stapled_;
+    std::optional<verify::JudgedTicket> current_;  // of the service, or of the directory
     bool isStapledAcceptable_ = false;
     verify::VerifiedCode code_;
     bool hasCode_ = false;  // the bytes were looked at

@@ -50,7 +50,8 @@ std::string dateOf(std::int64_t seconds) {
     return foundation::toString(foundation::Date{seconds});
 }
 
-bool checkAge(std::int64_t most, const JudgedTicket* ticket, std::int64_t now, verify::Section& section) {
+bool checkAge(std::int64_t most, const verify::JudgedTicket* ticket, std::int64_t now,
+              verify::Section& section) {
     const std::string wanted = format("a ticket that was signed at %@ or later", dateOf(now - most));
     const char* const place = "ticket";
     if (ticket == nullptr) {
@@ -125,8 +126,8 @@ bool matchesGlob(std::string_view glob, std::string_view text) {
     return glob.find_first_not_of('*', in) == std::string_view::npos;
 }
 
-bool checkAgainst(const Policy& policy, const JudgedTicket* deciding, const verify::VerifiedCode& code,
-                  std::int64_t now, verify::Section& section) {
+bool checkAgainst(const Policy& policy, const verify::JudgedTicket* deciding,
+                  const verify::VerifiedCode& code, std::int64_t now, verify::Section& section) {
     bool isSatisfied = true;
     if (policy.maximumTicketAge)
         isSatisfied = checkAge(*policy.maximumTicketAge, deciding, now, section) && isSatisfied;

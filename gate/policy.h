@@ -17,8 +17,8 @@
 #include <string_view>
 
 #include "gate/options.h"
-#include "gate/ticket.h"
 #include "verify/executable.h"
+#include "verify/judged_ticket.h"
 
 namespace pinwell::gate {
 
@@ -44,7 +44,7 @@ Policy readPolicyFile(const std::string& path);
 /// Adds a check for each thing that the policy asks. `deciding`: the ticket whose age counts; null without a
 /// genuine one. Every slice of the artefact's own code must satisfy it; nested code need not. Returns whether
 /// all passed.
-bool checkAgainst(const Policy& policy, const JudgedTicket* deciding, const verify::VerifiedCode& code,
-                  std::int64_t now, verify::Section& section);
+bool checkAgainst(const Policy& policy, const verify::JudgedTicket* deciding,
+                  const verify::VerifiedCode& code, std::int64_t now, verify::Section& section);
 
 }  // namespace pinwell::gate

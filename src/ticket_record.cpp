@@ -21,9 +21,6 @@ constexpr std::string_view kDefaultsDomain = "com.ostrel.tm.pinwell";
 constexpr std::string_view kContainerKey = "lm-container";
 constexpr std::string_view kProductionKey = "lm-production";
 
-constexpr int kRecordNameVersionPlain = 1;
-constexpr int kRecordNameVersionWithAlgorithm = 2;
-
 constexpr int kHTTPStatusOK = 200;
 constexpr std::string_view kFileNameToken = "${f}";
 constexpr std::string_view kAssetFileName = "lmasset.ticket";
@@ -43,12 +40,6 @@ const std::string* textOrNil(const Value& value) {
 }
 
 }  // namespace
-
-std::string recordNameForHash(std::uint32_t algorithm, foundation::ByteView hash) {
-    const std::string hex = foundation::toHex(hash);
-    if (algorithm == 0) return foundation::format("%d/%@", kRecordNameVersionPlain, hex);
-    return foundation::format("%d/%d/%@", kRecordNameVersionWithAlgorithm, algorithm, hex);
-}
 
 foundation::Result<URL> lookupURL(const Platform& platform) {
     const auto host = platform.directory.lumoraHost();

@@ -19,15 +19,12 @@
 #include "foundation/value.h"
 #include "https/session.h"
 #include "src/platform.h"
+#include "src/record_name.h"
 
 namespace pinwell {
 
 /// The response header that names a request.
 inline constexpr std::string_view kRequestIdentifierHeader = "X-Ostrel-Request-UUID";
-
-/// The name of the record that holds the ticket for a code hash: "2/ALGORITHM/HEX", or "1/HEX" if the
-/// algorithm is 0.
-std::string recordNameForHash(std::uint32_t algorithm, foundation::ByteView hash);
 
 /// Where records are looked up: the platform directory's host, and the container and environment of the user
 /// defaults where the build variant allows them. The error says what is wrong with platform.json.

@@ -1,0 +1,93 @@
+#include "verify/judged_ticket.h"
+
+#include <algorithm>
+
+#include "foundation/format.h"
+#include "src/satchel.h"
+#include "src/tm_ticket.h"
+#include "verify/check_names.h"
+
+namespace pinwell::verify {
+
+using foundation::format;
+
+JudgedTicket::JudgedTicket(ByteView bytes, trust::TrustService& trust,
+                           const std::function<std::string()>& explain) {
+    tm_ticket* decoded = nullptr;
+    if (satchel_get_validated_tm_ticket(bytes.data(), bytes.size(), &decoded, trust) != 0) {
+        fault_ = explain();
+        return;
+    }
+    const tm_ticket_ptr ticket(decoded);
+    isGenuine_ = true;
+    isRevoked_ = (tm_ticket_get_flags(ticket.get()) & pinwell::kTicketRevoked) != 0;
+    signatureTime_ = tm_ticket_get_signature_time(ticket.get());
+    const std::uint32_t count = tm_ticket_get_cdhash_count(ticket.get());
+    for (std::uint32_t i = 0; i < count; ++i) {
+        tm_cdhash entry;
+        if (tm_ticket_copy_cdhash(ticket.get(), i, &entry) != 0) continue;
+        entries_.insert(
+            foundation::toString(ByteView(entry.hash).first(tm_cdhash_algorithm_get_size(entry.algorithm))));
+    }
+}
+
+bool JudgedTicket::lists(ByteView codeHash) const {
+    return entries_.contains(foundation::toString(codeHash));
+}
+
+bool checkTicket(const JudgedTicket& ticket, const std::optional<Data>& codeHash, const std::string& place,
+                 Section& section) {
+    if (!ticket.isGenuine()) {
+        section.fail(kTicketGenuine, place, "a ticket of a trusted signer", ticket.fault());
+        return false;
+    }
+    section.pass(kTicketGenuine, place, "a ticket of a trusted signer");
+    if (ticket.isRevoked()) {
+        section.fail(kTicketRevoked, place, "a ticket that does not revoke", "it revokes the software");
+        return false;
+    }
+    section.pass(kTicketRevoked, place, "a ticket that does not revoke");
+    if (!codeHash) {
+        section.fail(kTicketLists, place, "the artefact's hash",
+                     "the artefact has no hash that a ticket could list");
+        return false;
+    }
+    const std::string hash = foundation::toHex(*codeHash);
+    if (!ticket.lists(*codeHash)) {
+        section.fail(kTicketLists, place, hash, format("%zu other hashes", ticket.entryCount()));
+        return false;
+    }
+    section.pass(kTicketLists, place, hash);
+    return true;
+}
+
+bool checkListing(const VerifiedCode& code, const std::function<bool(ByteView)>& lists, Section& section) {
+    bool isVouchedFor = true;
+    for (const CodeIdentity& identity : code.identities) {
+        const std::string hash = foundation::toHex(identity.codeHashes.front());
+        if (std::any_of(identity.codeHashes.begin(), identity.codeHashes.end(), lists)) {
+            section.pass(kCodeListed, identity.place, hash);
+        } else if (identity.isSealed) {
+            section.note(kCodeListed, identity.place, hash,
+                         "the ticket does not list it; the seal around it names it");
+        } else {
+            section.fail(kCodeListed, identity.place, hash, "the ticket does not list it");
+            isVouchedFor = false;
+        }
+    }
+    return isVouchedFor;
+}
+
+bool checkOneArtefact(const VerifiedCode& code, const std::optional<Data>& codeHash, Section& section) {
+    if (!codeHash || code.identities.empty()) return true;
+    const bool isThere =
+        std::any_of(code.identities.begin(), code.identities.end(), [&](const CodeIdentity& identity) {
+            return !identity.isNested && identity.codeHashes.front() == *codeHash;
+        });
+    if (isThere) return true;
+    section.fail(kArtefact, {}, foundation::toHex(*codeHash),
+                 foundation::toHex(code.identities.front().codeHashes.front()));
+    return false;
+}
+
+}  // namespace pinwell::verify
