@@ -49,6 +49,8 @@ std::optional<std::string_view> parentOfMIMEIdentifier(std::string_view identifi
 
 class Service final : public TypeService {
   public:
+    explicit Service(MimeDatabase database) : database_(database) {}
+
     std::string typeIdentifier(const Item& item) override {
         if (item.kind == ItemKind::symbolicLink) return std::string(kSymbolicLink);
         if (item.kind == ItemKind::other) return std::string(kItem);
@@ -56,7 +58,7 @@ class Service final : public TypeService {
         if (extension.empty()) return std::string(identifierWithoutExtension(item));
         if (const auto declared = declaredIdentifier(extension, item.kind); !declared.empty())
             return std::string(declared);
-        if (auto mimeType = mimeTypeForExtension(extension))
+        if (auto mimeType = mimeTypeFor(extension))
             return identifierForMIMEType(std::move(*mimeType), item.kind);
         return std::string(kDynamicPrefix) + foundation::toHex(foundation::asBytes(extension));
     }
@@ -70,7 +72,7 @@ class Service final : public TypeService {
         if (conforms(declared, kApplication)) return "application";
         if (declared.starts_with("com.ostrel.installer-")) return "installer package";
         if (item.kind == ItemKind::directory) return declared.empty() ? "folder" : "document";
-        const auto mimeType = extension.empty() ? std::nullopt : mimeTypeForExtension(extension);
+        const auto mimeType = extension.empty() ? std::nullopt : mimeTypeFor(extension);
         return (mimeType ? mimeDescription(*mimeType) : std::nullopt).value_or("document");
     }
 
@@ -86,12 +88,19 @@ class Service final : public TypeService {
     }
 
     bool isDynamic(std::string_view identifier) override { return identifier.starts_with(kDynamicPrefix); }
+
+  private:
+    std::optional<std::string> mimeTypeFor(const std::string& extension) const {
+        return database_ == MimeDatabase::asked ? mimeTypeForExtension(extension) : std::nullopt;
+    }
+
+    const MimeDatabase database_;
 };
 
 }  // namespace
 
-std::unique_ptr<TypeService> makeTypeService() {
-    return std::make_unique<Service>();
+std::unique_ptr<TypeService> makeTypeService(MimeDatabase database) {
+    return std::make_unique<Service>(database);
 }
 
 }  // namespace pinwell::types

@@ -35,7 +35,12 @@ class TypeService {
     virtual bool isDynamic(std::string_view identifier) = 0;
 };
 
-/// The declarations of this platform, and the freedesktop.org shared MIME database behind them.
-std::unique_ptr<TypeService> makeTypeService();
+/// Whether the freedesktop.org shared MIME database is asked about what this platform does not declare. Its
+/// library is opened for that, and reads files that the environment names.
+enum class MimeDatabase { asked, leftAlone };
+
+/// The declarations of this platform, and the database behind them. Without it an undeclared type is dynamic,
+/// which makes no difference to what kind of artefact something is.
+std::unique_ptr<TypeService> makeTypeService(MimeDatabase database = MimeDatabase::asked);
 
 }  // namespace pinwell::types

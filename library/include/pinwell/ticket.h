@@ -28,7 +28,7 @@
 // Threads. The library keeps no state that can be seen; every function may be called from any number of
 // threads at once, and so may the members of one object that are const. It prints nothing, goes by no
 // environment variable (libcrypto, which it uses, has its own), and touches no file but those it is given.
-// One exception, which the tool makes as well: validate() asks the dynamic loader for
+// It stays loaded after dlclose(). One exception, which the tool makes as well: validate() asks the dynamic loader for
 // libostrelsecurity.so.1, and goes by the ticket-signing policy of that library where there is one (its
 // interface is <pinwell/ostrel_security.h>); it is loaded into the process.
 //
@@ -38,6 +38,9 @@
 // that you do not know as a refusal of a kind you do not know. Change that breaks this has a new name
 // (libpinwell-ticket.so.1) and a new inline namespace, so that both can be loaded side by side. The interface
 // takes and returns types of the standard library: use the C++ library that this one was built with.
+//
+// <pinwell/ticket_c.h> is the other interface of the library, for C and whatever calls C. It judges whole
+// artefacts and verifies them down to every byte.
 #pragma once
 
 #include <cstddef>
@@ -49,11 +52,7 @@
 #include <variant>
 #include <vector>
 
-#define PINWELL_TICKET_VERSION_MAJOR 0
-#define PINWELL_TICKET_VERSION_MINOR 1
-
-/// Comparable as a number: 0.1 is 1, 0.2 is 2, 1.0 is 1000.
-#define PINWELL_TICKET_VERSION (PINWELL_TICKET_VERSION_MAJOR * 1000 + PINWELL_TICKET_VERSION_MINOR)
+#include "pinwell/ticket_version.h"
 
 #define PINWELL_TICKET_API __attribute__((visibility("default")))
 

@@ -1,0 +1,200 @@
+#include "library/assessment.h"
+
+#include <pthread.h>
+
+#include <csignal>
+#include <utility>
+
+#include "library/local_platform.h"
+#include "src/record_name.h"
+#include "verify/artefact_kind.h"
+#include "verify/check_names.h"
+#include "verify/judged_ticket.h"
+#include "verify/verify.h"
+
+namespace pinwell::library {
+
+using foundation::URL;
+using verify::Kind;
+using verify::Outcome;
+
+namespace {
+
+const char* const kStapledPlace = "stapled ticket";
+
+pinwell_kind numberOf(Kind kind) {
+    switch (kind) {
+        case Kind::bundle:
+            return PINWELL_KIND_BUNDLE;
+        case Kind::executable:
+            return PINWELL_KIND_EXECUTABLE;
+        case Kind::diskImage:
+            return PINWELL_KIND_DISK_IMAGE;
+        case Kind::package:
+            break;
+    }
+    return PINWELL_KIND_PACKAGE;
+}
+
+/// While it lives, threads that this one starts get no signals: those are the host's to handle.
+class SignalsBlocked {
+  public:
+    SignalsBlocked() noexcept {
+        sigset_t all;
+        sigfillset(&all);
+        pthread_sigmask(SIG_SETMASK, &all, &before_);
+    }
+    ~SignalsBlocked() { pthread_sigmask(SIG_SETMASK, &before_, nullptr); }
+    SignalsBlocked(const SignalsBlocked&) = delete;
+    SignalsBlocked& operator=(const SignalsBlocked&) = delete;
+
+  private:
+    sigset_t before_{};
+};
+
+verify::Report verifyWithThreads(const verify::Subject& subject, unsigned threads) {
+    std::optional<verify::Workers> workers;
+    {
+        const SignalsBlocked blocked;
+        workers.emplace(threads);
+    }
+    return verify::verifyArtefact(subject, *workers);
+}
+
+void flattenInto(verify::Section& section, std::uint32_t depth, std::vector<PlacedCheck>& all) {
+    for (verify::Check& check : section.checks) all.push_back({std::move(check), depth});
+    for (verify::Section& part : section.sections) flattenInto(part, depth + 1, all);
+}
+
+/// One artefact on its way to a verdict. The gravest of several is the verdict of all.
+class Assessor {
+  public:
+    Assessor(const std::string& path, Depth depth, const ticket::TrustedRoots& roots,
+             const Settings& settings)
+        : url_(URL::fileURLWithPath(path)),
+          depth_(depth),
+          roots_(roots),
+          settings_(settings),
+          platform_(&roots, settings.evaluationTime),
+          services_(platform_.services()) {}
+
+    Assessment run() && {
+        found_.reason = depth_ == Depth::ticket ? "Its ticket is good."
+                                                : "It is what was signed, and its ticket is good.";
+        if (open()) {
+            if (depth_ == Depth::ticket) {
+                judgeTicketAlone();
+            } else {
+                judgeEverything();
+            }
+        }
+        flattenInto(checks_, 0, found_.checks);
+        return std::move(found_);
+    }
+
+  private:
+    void atLeast(pinwell_verdict verdict, const char* reason) {
+        if (verdict <= found_.verdict) return;
+        found_.verdict = verdict;
+        found_.reason = reason;
+    }
+
+    bool open() {
+        verify::OpenedArtefact opened = verify::openArtefact(url_, services_);
+        if (opened.file == nullptr) {
+            atLeast(PINWELL_VERDICT_UNREADABLE, opened.problem.c_str());
+            checks_.cannotRead(verify::kArtefact, {}, opened.problem);
+            return false;
+        }
+        file_ = std::move(opened.file);
+        kind_ = opened.kind;
+        found_.kind = numberOf(kind_);
+        return true;
+    }
+
+    void readHashAndTicket() {
+        // The tool goes no further with such a file, which has no hash and no ticket to it.
+        if (file_->appropriateExitCode() != kExitOK) return;
+        found_.codeHash = file_->cdHash();
+        if (found_.codeHash) {
+            found_.digestType = file_->digestAlgorithm();
+            found_.recordName = recordNameForHash(found_.digestType, *found_.codeHash);
+        }
+        found_.ticket = file_->ticketData();
+    }
+
+    void withoutSignature() {
+        atLeast(PINWELL_VERDICT_UNREADABLE, "It has no valid signature.");
+        checks_.cannotRead(verify::kSignature, {}, "there is no valid signature");
+    }
+
+    // As the tool: without a hash it asks for no ticket.
+    void judgeTicketAlone() {
+        readHashAndTicket();
+        if (!found_.codeHash) return withoutSignature();
+        judgeTicket();
+    }
+
+    void judgeEverything() {
+        readHashAndTicket();
+        const bool isAcceptable = found_.ticket && judgeTicket();
+        verify::Report report = verifyWithThreads({kind_, url_.path()}, settings_.threads);
+        // The tool has found the hash, and these checks the code: of two openings of one path.
+        if (!verify::checkOneArtefact(report.code, found_.codeHash, checks_))
+            atLeast(PINWELL_VERDICT_ALTERED, "It changed while it was read.");
+        if (!report.code.isSigned && !found_.codeHash && !found_.ticket) return withoutSignature();
+        if (!found_.ticket) judgeTicket();
+        takeOutcome(verify::worstOutcome(report.root));
+        if (isAcceptable && !verify::checkListing(
+                                report.code, [&](const auto& hash) { return judged_->lists(hash); }, checks_))
+            atLeast(PINWELL_VERDICT_ALTERED, "There is code in it that nobody vouches for.");
+        checks_.sections.push_back(std::move(report.root));
+    }
+
+    bool judgeTicket() {
+        if (!found_.ticket) {
+            checks_.fail(verify::kTicketStapled, kStapledPlace, "a ticket",
+                         kind_ == Kind::executable
+                             ? "none: an executable outside a bundle has no place for one"
+                             : "none");
+            atLeast(PINWELL_VERDICT_NO_TICKET, "No ticket is stapled to it.");
+            return false;
+        }
+        checks_.pass(verify::kTicketStapled, kStapledPlace, "a ticket");
+        judged_.emplace(*found_.ticket, services_.trust, [&] {
+            return ticket::validate(*found_.ticket, roots_, settings_.evaluationTime).reason;
+        });
+        if (verify::checkTicket(*judged_, found_.codeHash, kStapledPlace, checks_)) return true;
+        if (judged_->isGenuine() && judged_->isRevoked())
+            atLeast(PINWELL_VERDICT_REVOKED, "Its ticket revokes it: it must not run.");
+        else
+            atLeast(PINWELL_VERDICT_REFUSED, "Its ticket is not acceptable.");
+        return false;
+    }
+
+    void takeOutcome(Outcome worst) {
+        if (worst == Outcome::failed) atLeast(PINWELL_VERDICT_ALTERED, "It is not what was signed.");
+        if (worst == Outcome::unreadable) atLeast(PINWELL_VERDICT_UNREADABLE, "Not all of it can be read.");
+    }
+
+    const URL url_;
+    const Depth depth_;
+    const ticket::TrustedRoots& roots_;
+    const Settings settings_;
+    const LocalPlatform platform_;
+    const Platform services_;
+    std::shared_ptr<PWHashedFile> file_;
+    Kind kind_ = Kind::bundle;
+    std::optional<verify::JudgedTicket> judged_;
+    verify::Section checks_;
+    Assessment found_;
+};
+
+}  // namespace
+
+Assessment assess(const std::string& path, Depth depth, const ticket::TrustedRoots& roots,
+                  const Settings& settings) {
+    return Assessor(path, depth, roots, settings).run();
+}
+
+}  // namespace pinwell::library

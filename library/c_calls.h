@@ -1,0 +1,84 @@
+// The boundary of the C interface: what comes in is checked, and nothing but a status goes out. For this
+// folder only.
+#pragma once
+
+#include <cstddef>
+#include <new>
+#include <string>
+
+#include "library/failure.h"
+#include "pinwell/ticket_c.h"
+
+namespace pinwell::library {
+
+/// While it lives, the calling thread cannot be cancelled: that would unwind through a function of C.
+class Uncancelled {
+  public:
+    Uncancelled() noexcept;
+    ~Uncancelled();
+    Uncancelled(const Uncancelled&) = delete;
+    Uncancelled& operator=(const Uncancelled&) = delete;
+
+  private:
+    int before_ = 0;
+};
+
+/// Fills `error` in, if there is one, and returns the failure's status.
+pinwell_status report(const Failure& failure, pinwell_error* error) noexcept;
+pinwell_status reportOutOfMemory(pinwell_error* error) noexcept;
+pinwell_status reportInternal(const char* what, pinwell_error* error) noexcept;
+
+/// Whether a structure of the caller's is one that this library knows: at least as long as it was first.
+template <class Structure>
+bool hasKnownSize(const Structure* structure) noexcept {
+    return structure == nullptr || structure->struct_size >= sizeof(Structure);
+}
+
+/// Calls `work`, and turns what it throws into a status.
+template <class Work>
+pinwell_status guarded(pinwell_error* error, Work work) noexcept {
+    const Uncancelled uncancelled;
+    if (!hasKnownSize(error)) return PINWELL_ERROR_ARGUMENT;
+    try {
+        work();
+        return PINWELL_OK;
+    } catch (const Failure& failure) {
+        return report(failure, error);
+    } catch (const std::bad_alloc&) {
+        return reportOutOfMemory(error);
+    } catch (const std::exception& failure) {
+        return reportInternal(failure.what(), error);
+    } catch (...) {
+        return reportInternal("unknown exception", error);
+    }
+}
+
+/// A path of the caller's, as text. Throws Failure if there is none, or a zero byte is in it.
+std::string pathFrom(const char* path, std::size_t length);
+
+/// Leaves no handle in a place that the caller may look at after a failure.
+template <class Handle>
+void empty(Handle** place) noexcept {
+    if (place != nullptr) *place = nullptr;
+}
+
+/// Throws Failure if a pointer that has to be there is null.
+inline void require(const void* pointer, const char* problem) {
+    if (pointer == nullptr) throw invalid(problem);
+}
+
+/// Hands out a text or a buffer with its length. `length` may be null.
+template <class Range>
+auto handOut(const Range& range, std::size_t* length) noexcept {
+    if (length != nullptr) *length = range.size();
+    return range.data();
+}
+
+/// What is handed out from a handle that is none.
+template <class Type = char>
+const Type* nothing(std::size_t* length) noexcept {
+    if (length != nullptr) *length = 0;
+    return nullptr;
+}
+
+}  // namespace pinwell::library

@@ -1,0 +1,70 @@
+#include "library/local_platform.h"
+
+#include <stdexcept>
+#include <utility>
+
+#include "library/roots.h"
+#include "src/type_naming.h"
+#include "trust/trust_service.h"
+
+namespace pinwell::library {
+
+namespace {
+
+// What artefacts are looked at with asks for none of these; a program that has us loaded would not want it.
+
+[[noreturn]] void refuse(const char* what) {
+    throw std::logic_error(what);
+}
+
+class NoSessions final : public https::SessionService {
+    foundation::Result<std::shared_ptr<https::Session>> ephemeralSession(https::SessionDelegate&) override {
+        refuse("the library asks no service");
+    }
+};
+
+class NoDefaults final : public defaults::UserDefaultsService {
+    std::unique_ptr<defaults::UserDefaults> openDomain(std::string_view) override {
+        refuse("the library has no user's settings");
+    }
+};
+
+/// What the tool writes there is part of the verdict here.
+class NoLog final : public syslog::SystemLog {
+    void error(std::string_view) override {}
+};
+
+}  // namespace
+
+struct LocalPlatform::Services {
+    Services(const ticket::TrustedRoots* roots, std::int64_t evaluationTime)
+        : files(files::makeLocalFileManager(
+              [this](const files::ItemFacts& facts) { return nameType(*types, facts); })),
+          trust(trust::makeTrustService(
+              [contents = roots == nullptr ? nullptr : ticket::TrustedRootsAccess::contentsOf(*roots)] {
+                  return contents == nullptr ? trust::Anchors() : contents->anchors;
+              },
+              [evaluationTime] { return foundation::Date{evaluationTime}; })) {}
+
+    const std::unique_ptr<types::TypeService> types = types::makeTypeService(types::MimeDatabase::leftAlone);
+    const std::unique_ptr<files::FileManager> files;
+    const std::unique_ptr<codesign::CodeSigningService> codeSigning = codesign::makeCodeSigningService();
+    const std::unique_ptr<trust::TrustService> trust;
+    const std::unique_ptr<https::SessionService> https = std::make_unique<NoSessions>();
+    const std::unique_ptr<defaults::UserDefaultsService> defaults = std::make_unique<NoDefaults>();
+    const std::unique_ptr<syslog::SystemLog> log = std::make_unique<NoLog>();
+    const foundation::PlatformDirectory directory{std::string()};
+};
+
+LocalPlatform::LocalPlatform(const ticket::TrustedRoots* roots, std::int64_t evaluationTime)
+    : services_(std::make_unique<const Services>(roots, evaluationTime)) {}
+
+LocalPlatform::~LocalPlatform() = default;
+
+Platform LocalPlatform::services() const {
+    return {*services_->files, *services_->types,    *services_->codeSigning,
+            *services_->trust, *services_->https,    *services_->defaults,
+            *services_->log,   services_->directory, [](int) { refuse("the library ends no process"); }};
+}
+
+}  // namespace pinwell::library

@@ -1,0 +1,29 @@
+// The platform as it is inside another program: files, types, code signatures and trust, and nothing that
+// speaks to anybody. For this folder only.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+
+#include "pinwell/ticket.h"
+#include "src/platform.h"
+
+namespace pinwell::library {
+
+/// Owns its services; must outlive what was given services(). For one call, and one thread.
+class LocalPlatform {
+  public:
+    /// `roots` null: nothing is trusted.
+    LocalPlatform(const ticket::TrustedRoots* roots, std::int64_t evaluationTime);
+    ~LocalPlatform();
+    LocalPlatform(const LocalPlatform&) = delete;
+    LocalPlatform& operator=(const LocalPlatform&) = delete;
+
+    Platform services() const;
+
+  private:
+    struct Services;
+    const std::unique_ptr<const Services> services_;
+};
+
+}  // namespace pinwell::library
