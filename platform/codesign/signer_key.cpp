@@ -87,7 +87,9 @@ const EVP_MD* digestNamed(ByteView identifier) {
 std::size_t bitsOf(ByteView number) {
     const auto first = std::ranges::find_if(number, [](std::byte b) { return b != std::byte{0}; });
     const auto length = static_cast<std::size_t>(number.end() - first);
-    return length == 0 ? 0 : 8 * (length - 1) + std::bit_width(std::to_integer<unsigned>(*first));
+    if (length == 0) return 0;
+    // The width's type differs between the versions of the standard library.
+    return 8 * (length - 1) + static_cast<std::size_t>(std::bit_width(std::to_integer<unsigned>(*first)));
 }
 
 // The bits of the modulus in { modulus, exponent }, the contents of the key's BIT STRING after its first

@@ -109,7 +109,12 @@ class XMLParser::Library {
     void finish() { parse(true); }
 
     std::uint64_t offset() const {
+#if XML_MAJOR_VERSION > 2 || XML_MINOR_VERSION >= 9  // the older name is deprecated from 2.9 on
+        return static_cast<std::uint64_t>(
+            std::max<std::int64_t>(XML_GetCurrentByteIndex64(handle_.get()), 0));
+#else
         return static_cast<std::uint64_t>(std::max<XML_Index>(XML_GetCurrentByteIndex(handle_.get()), 0));
+#endif
     }
 
   private:
@@ -148,7 +153,9 @@ class XMLParser::Library {
         }
     }
 
-    [[noreturn]] void refuse(const char* what) const { throw MalformedXML(offset(), what); }
+    [[noreturn]] void refuse(const char* what) const {
+        throw MalformedXML(offset(), what);
+    }
 
     // Null for a version or an encoding that is not given.
     void declaration(const char* version, const char* encoding) {
