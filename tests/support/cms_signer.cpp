@@ -99,10 +99,13 @@ Message signMessage(const Identity& identity, int contentType, ByteView content,
     CMS_SignerInfo* const signer =
         CMS_add1_signer(message.get(), identity.certificate.get(), identity.key.get(), EVP_sha256(), flags);
     require(signer != nullptr, "signer");
-    if (pss)
-        require(
-            EVP_PKEY_CTX_set_rsa_padding(CMS_SignerInfo_get0_pkey_ctx(signer), RSA_PKCS1_PSS_PADDING) == 1,
-            "padding");
+    if (pss) {
+        EVP_PKEY_CTX* const choices = CMS_SignerInfo_get0_pkey_ctx(signer);
+        // What the library chooses by itself differs between its versions.
+        require(EVP_PKEY_CTX_set_rsa_padding(choices, RSA_PKCS1_PSS_PADDING) == 1 &&
+                    EVP_PKEY_CTX_set_rsa_pss_saltlen(choices, CmsBuilder::kPssSaltLength) == 1,
+                "padding");
+    }
     require(CMS_final(message.get(), reader(content).get(), nullptr, flags) == 1, "signature");
     return message;
 }

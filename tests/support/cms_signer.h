@@ -71,7 +71,8 @@ class CmsBuilder {
     /// The signer is named by the key identifier in the certificate.
     CmsBuilder& byKeyIdentifier();
 
-    /// RSASSA-PSS; of an RSA key only.
+    /// RSASSA-PSS; of an RSA key only. The salt is the longest for 2048 bits and SHA-256: 256 - 32 - 2 bytes.
+    static constexpr int kPssSaltLength = 222;
     CmsBuilder& pss();
 
     /// One bit of the signature value is wrong.
