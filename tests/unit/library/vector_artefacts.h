@@ -1,0 +1,35 @@
+// The artefacts of the test vectors (tests/vectors), made for one test.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "foundation/value.h"
+#include "support/temporary_directory.h"
+
+namespace pinwell::test {
+
+struct Vector {
+    foundation::Value expected;
+    std::string path;
+};
+
+class VectorArtefacts {
+  public:
+    /// Throws if they cannot be made.
+    VectorArtefacts();
+
+    const std::vector<Vector>& all() const noexcept { return vectors_; }
+
+    /// The path of the artefact of the vector with this name; throws if there is none.
+    const std::string& named(std::string_view name) const;
+
+    /// The platform directory that their tickets are judged by.
+    static std::string platform();
+
+  private:
+    TemporaryDirectory directory_;
+    std::vector<Vector> vectors_;
+};
+
+}  // namespace pinwell::test
