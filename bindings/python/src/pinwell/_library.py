@@ -1,0 +1,50 @@
+"""The shared library, and its texts and bytes as Python's."""
+
+from __future__ import annotations
+
+import os
+from typing import Any, Union
+
+from ._ffi import ffi
+
+LIBRARY = "libpinwell-ticket.so.0"
+OLDEST = 2  # interface 0.2, with which the functions came
+
+PathLike = Union[str, bytes, "os.PathLike[str]", "os.PathLike[bytes]"]
+
+
+def _load() -> Any:
+    library = ffi.dlopen(LIBRARY)
+    try:
+        version = library.pinwell_version()
+    except AttributeError:
+        version = 0
+    if version < OLDEST:
+        raise ImportError(f"{LIBRARY} is too old: the interface has to be 0.{OLDEST} or later")
+    return library
+
+
+lib: Any = _load()
+
+
+def path_bytes(path: PathLike) -> bytes:
+    """A path as the system has it."""
+    return os.fsencode(path)
+
+
+def text(pointer: Any, length: int) -> str:
+    """A text from the library, whatever bytes are in it."""
+    return "" if pointer == ffi.NULL else os.fsdecode(bytes(ffi.buffer(pointer, length)))
+
+
+def text_of(function: Any, handle: Any) -> str:
+    """What a function hands out as a text."""
+    length = ffi.new("size_t *")
+    return text(function(handle, length), length[0])
+
+
+def bytes_of(function: Any, handle: Any) -> bytes | None:
+    """What a function hands out as bytes."""
+    length = ffi.new("size_t *")
+    pointer = function(handle, length)
+    return None if pointer == ffi.NULL else bytes(ffi.buffer(pointer, length[0]))

@@ -1,0 +1,3 @@
+module pinwell.example/judge
+
+go 1.19
