@@ -2,9 +2,11 @@
 #
 #   awk -v part=failures -f test_report.awk PRINTED LastTest.log     each failed test with what it said
 #   awk -v part=skips -f test_report.awk PRINTED LastTest.log        REASON<tab>NAME for each test that was left out
+#   awk -v part=counts -f test_report.awk PRINTED LastTest.log       PASSED FAILED SKIPPED TESTS, the last as ctest counts
 #
 # A test of ctest is a program: one case of GoogleTest, many of them, or a script. Of many cases, those are told that
-# failed or were left out. LastTest.log alone does not tell: it has skipped tests for passed.
+# failed or were left out, and all are counted. LastTest.log alone does not tell: it has skipped tests for passed. Of a
+# test that was tried more than once, the last time counts.
 
 function tell(  i) {
   printf "\n-- %s (%s)\n", name, result[name]
@@ -17,16 +19,35 @@ function skip(who, why) {
   if (part == "skips") printf "%s\t%s\n", why == "" ? "no reason given" : why, who
 }
 
+# What became of the cases of the program that has just ended.
+function tally() {
+  if (!totals) {
+    passed_of[name] = failed_of[name] = skipped_of[name] = 0
+    if (result[name] == "Skipped") skipped_of[name] = 1
+    else if (result[name] == "") passed_of[name] = 1
+    else failed_of[name] = 1
+    return
+  }
+  passed_of[name] = passed
+  skipped_of[name] = skipped
+  # One that broke down behind its last case, say.
+  failed_of[name] = failed == 0 && result[name] != "" && result[name] != "Skipped" ? 1 : failed
+}
+
 FNR == NR {
   if (match($0, /Test +#[0-9]+: [^ ]+ .*\*\*\*/)) {
     how = substr($0, RSTART + RLENGTH); sub(/  +[0-9.]+ sec.*/, "", how)
     who = $0; sub(/^.*Test +#[0-9]+: /, "", who); sub(/ .*/, "", who)
     result[who] = how
+  } else if (match($0, /Test +#[0-9]+: [^ ]+ .* Passed /)) {
+    who = $0; sub(/^.*Test +#[0-9]+: /, "", who); sub(/ .*/, "", who)
+    delete result[who]
   }
   next
 }
 /^[0-9]+\/[0-9]+ Testing: / {
   name = $3; count = 0; cases = 0; start = 0; last = ""; reason = ""; in_reason = 0
+  totals = 0; passed = 0; failed = 0; skipped = 0
   next
 }
 /^Output:$/ { getline; inside = 1; next }
@@ -34,9 +55,14 @@ FNR == NR {
   inside = 0
   if (result[name] == "Skipped" && !cases) { sub(/^SKIPPED: /, "", last); skip(name, last) }
   if (part == "failures" && name in result && result[name] != "" && result[name] != "Skipped") tell()
+  tally()
   next
 }
 inside {
+  if ($0 ~ /^\[==========\] [0-9]+ tests? from .* ran\./) totals = 1
+  if (totals && $0 ~ /^\[  PASSED  \] [0-9]+ tests?\.$/) passed = $4
+  if (totals && $0 ~ /^\[  SKIPPED \] [0-9]+ tests?, listed below:$/) skipped = $4
+  if (totals && $0 ~ /^\[  FAILED  \] [0-9]+ tests?, listed below:$/) failed = $4
   if ($0 ~ /^\[ RUN      \] /) start = count
   said[++count] = $0
   # A case that went well, or was left out, is not what made its program fail.
@@ -46,4 +72,10 @@ inside {
   if (in_reason) reason = reason (reason == "" ? "" : " ") $0
   if ($0 ~ /^[^ ]+:[0-9]+: Skipped$/) { in_reason = 1; reason = "" }
   if ($0 != "") last = $0
+}
+END {
+  if (part == "counts") {
+    for (name in passed_of) { p += passed_of[name]; f += failed_of[name]; s += skipped_of[name]; tests++ }
+    print p + 0, f + 0, s + 0, tests + 0
+  }
 }
