@@ -2,6 +2,7 @@
 #include "foundation/json.h"
 
 #include "foundation/description.h"
+#include "foundation/value.h"
 #include "target.h"
 
 namespace pinwell::fuzz {

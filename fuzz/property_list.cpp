@@ -3,7 +3,9 @@
 
 #include <algorithm>
 
+#include "foundation/bytes.h"
 #include "foundation/description.h"
+#include "foundation/value.h"
 #include "target.h"
 
 namespace pinwell::fuzz {

@@ -4,8 +4,10 @@
 
 #include "codesign/byte_source.h"
 #include "codesign/code_error.h"
+#include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "foundation/places.h"
+#include "foundation/url.h"
 #include "gate/policy.h"
 #include "inspect/gather_ticket.h"
 #include "src/ticket_record.h"

@@ -10,6 +10,7 @@
 #include <optional>
 #include <string>
 
+#include "foundation/bytes.h"
 #include "gate/options.h"
 #include "gate/result.h"
 #include "gate/ticket_directory.h"

@@ -5,6 +5,7 @@
 #define TOML_EXCEPTIONS 0
 #include <toml++/toml.h>
 
+#include "foundation/bytes.h"
 #include "foundation/file_io.h"
 #include "foundation/format.h"
 #include "gate/policy.h"

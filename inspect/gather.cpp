@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "codesign/superblob.h"
+#include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "inspect/gather_ticket.h"
 #include "src/PWHashedFile/PWHashedBundle.h"

@@ -3,6 +3,7 @@
 
 #include <string>
 
+#include "foundation/url.h"
 #include "inspect/report.h"
 #include "src/platform.h"
 

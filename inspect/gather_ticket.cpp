@@ -4,6 +4,7 @@
 #include <utility>
 
 #include "foundation/format.h"
+#include "foundation/value.h"
 #include "src/satchel.h"
 #include "src/satchel_internal.h"
 #include "src/tm_ticket.h"

@@ -3,7 +3,9 @@
 #include <algorithm>
 #include <utility>
 
+#include "foundation/date.h"
 #include "foundation/format.h"
+#include "foundation/value.h"
 #include "library/conversion.h"
 #include "library/roots.h"
 #include "src/satchel.h"

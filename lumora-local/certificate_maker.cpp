@@ -1,4 +1,5 @@
 #include "lumora-local/certificate_maker.h"
+#include "foundation/bytes.h"
 
 #include <openssl/asn1.h>
 #include <openssl/bn.h>

@@ -3,8 +3,10 @@
 #include <filesystem>
 #include <system_error>
 
+#include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "foundation/json.h"
+#include "foundation/value.h"
 #include "lumora-local/failure.h"
 
 namespace pinwell::lumora {

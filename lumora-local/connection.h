@@ -17,6 +17,7 @@
 #include <optional>
 #include <string>
 
+#include "foundation/bytes.h"
 #include "lumora-local/connection_table.h"
 #include "lumora-local/http_rules.h"
 #include "lumora-local/server.h"

@@ -6,6 +6,7 @@
 #include "foundation/base64.h"
 #include "foundation/format.h"
 #include "foundation/json.h"
+#include "foundation/value.h"
 
 namespace pinwell::lumora {
 namespace {

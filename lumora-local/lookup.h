@@ -22,6 +22,7 @@
 #include <utility>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "lumora-local/endpoint.h"
 #include "lumora-local/record_store.h"
 

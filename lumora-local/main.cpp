@@ -11,6 +11,7 @@
 
 #include "companion/parse_errors.h"
 #include "companion/version.h"
+#include "foundation/date.h"
 #include "foundation/format.h"
 #include "foundation/process.h"
 #include "lumora-local/commands.h"

@@ -3,7 +3,9 @@
 #include <filesystem>
 #include <system_error>
 
+#include "foundation/bytes.h"
 #include "foundation/format.h"
+#include "foundation/url.h"
 #include "lumora-local/failure.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/host_platform.h"

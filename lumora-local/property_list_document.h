@@ -1,6 +1,7 @@
 // Property lists for the samples.
 #pragma once
 
+#include "foundation/bytes.h"
 #include "foundation/value.h"
 
 namespace pinwell::lumora {

@@ -4,6 +4,7 @@
 
 #include "foundation/byte_writer.h"
 #include "foundation/format.h"
+#include "foundation/value.h"
 #include "lumora-local/ad_hoc_signature.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/property_list_document.h"

@@ -1,9 +1,11 @@
 #include "lumora-local/service_directory.h"
 
+#include "foundation/bytes.h"
 #include "foundation/file_io.h"
 #include "foundation/format.h"
 #include "foundation/json.h"
 #include "foundation/platform_directory.h"
+#include "foundation/value.h"
 #include "lumora-local/authority.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"

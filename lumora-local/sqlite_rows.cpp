@@ -2,6 +2,7 @@
 
 #include <SQLiteCpp/SQLiteCpp.h>
 
+#include "foundation/date.h"
 #include "foundation/format.h"
 #include "lumora-local/failure.h"
 

@@ -6,6 +6,7 @@
 #include <functional>
 #include <limits>
 
+#include "foundation/date.h"
 #include "foundation/format.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"

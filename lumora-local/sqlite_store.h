@@ -7,6 +7,7 @@
 #include <memory>
 #include <mutex>
 
+#include "foundation/bytes.h"
 #include "lumora-local/record_store.h"
 
 namespace SQLite {

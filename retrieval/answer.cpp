@@ -3,6 +3,7 @@
 #include <stdexcept>
 
 #include "foundation/json.h"
+#include "foundation/value.h"
 #include "src/ticket_record.h"
 
 namespace pinwell::retrieval {

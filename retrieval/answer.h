@@ -7,6 +7,7 @@
 #include <string>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "https/session.h"
 
 namespace pinwell::retrieval {

@@ -4,6 +4,7 @@
 #include <utility>
 
 #include "foundation/process.h"
+#include "foundation/url.h"
 #include "src/DownloadDelegate.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"

@@ -17,6 +17,7 @@
 #include <string_view>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "retrieval/answer.h"
 #include "retrieval/cause.h"
 #include "src/PWHashedFile/PWHashedFile.h"

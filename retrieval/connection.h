@@ -7,6 +7,8 @@
 #include <string>
 #include <vector>
 
+#include "foundation/bytes.h"
+#include "foundation/url.h"
 #include "https/session.h"
 #include "retrieval/retry_policy.h"
 #include "src/platform.h"

@@ -13,8 +13,11 @@
 #include <thread>
 #include <utility>
 
+#include "foundation/bytes.h"
 #include "foundation/json.h"
 #include "foundation/process.h"
+#include "foundation/url.h"
+#include "foundation/value.h"
 #include "retrieval/connection.h"
 #include "src/ticket_record.h"
 

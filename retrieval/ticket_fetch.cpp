@@ -6,6 +6,7 @@
 
 #include "foundation/base64.h"
 #include "foundation/json.h"
+#include "foundation/value.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/messages.h"
 #include "src/ticket_record.h"

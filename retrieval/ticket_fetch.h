@@ -12,6 +12,7 @@
 #include <string_view>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "retrieval/cause.h"
 #include "retrieval/record_service.h"
 #include "retrieval/retry_policy.h"

@@ -1,6 +1,7 @@
 // The few properties of a code signature that the tool needs, above all the cdhash.
 #pragma once
 
+#include "foundation/url.h"
 #include "foundation/value.h"
 #include "src/platform.h"
 

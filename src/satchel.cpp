@@ -10,6 +10,7 @@
 
 #include "foundation/byte_reader.h"
 #include "foundation/error.h"
+#include "foundation/value.h"
 #include "src/satchel_internal.h"
 #include "trust/der.h"
 

@@ -16,6 +16,8 @@
 #include <string_view>
 #include <vector>
 
+#include "foundation/bytes.h"
+#include "foundation/url.h"
 #include "foundation/value.h"
 #include "https/session.h"
 #include "src/platform.h"

@@ -5,6 +5,7 @@
 #include <string>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "retrieval/report.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 

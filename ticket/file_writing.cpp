@@ -7,6 +7,7 @@
 #include <cerrno>
 #include <cstdio>
 
+#include "foundation/bytes.h"
 #include "foundation/file_io.h"
 
 namespace pinwell::ticket_files {

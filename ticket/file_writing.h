@@ -3,6 +3,7 @@
 
 #include <string>
 
+#include "foundation/bytes.h"
 #include "foundation/error.h"
 
 namespace pinwell::ticket_files {

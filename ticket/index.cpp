@@ -5,6 +5,7 @@
 
 #include "foundation/file_io.h"
 #include "foundation/json.h"
+#include "foundation/value.h"
 #include "ticket/file_writing.h"
 
 namespace pinwell::ticket_files {

@@ -4,6 +4,7 @@
 #include <utility>
 
 #include "codesign/code_error.h"
+#include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "foundation/property_list.h"
 #include "verify/bundle_layout.h"

@@ -6,6 +6,7 @@
 #include "codesign/disk_image_trailer.h"
 #include "codesign/superblob.h"
 #include "foundation/byte_reader.h"
+#include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "verify/check_names.h"
 #include "verify/page_hashes.h"

@@ -8,6 +8,7 @@
 #include "codesign/executable_image.h"
 #include "codesign/superblob.h"
 #include "foundation/byte_reader.h"
+#include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "verify/check_names.h"
 #include "verify/image_layout.h"

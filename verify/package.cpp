@@ -7,6 +7,7 @@
 #include "codesign/cms_signature.h"
 #include "codesign/code_error.h"
 #include "foundation/byte_reader.h"
+#include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "src/PWHashedFile/package_trailer_walk.h"
 #include "verify/archive_table.h"

@@ -9,6 +9,7 @@
 #include "codesign/byte_source.h"
 #include "codesign/digest.h"
 #include "codesign/executable_image.h"
+#include "foundation/bytes.h"
 
 namespace pinwell::verify {
 

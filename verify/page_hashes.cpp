@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "codesign/code_error.h"
+#include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "verify/check_names.h"
 #include "verify/page_digest.h"

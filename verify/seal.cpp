@@ -8,6 +8,7 @@
 #include "codesign/code_error.h"
 #include "foundation/format.h"
 #include "foundation/property_list.h"
+#include "foundation/value.h"
 
 namespace pinwell::verify {
 

@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "codesign/code_directory.h"
+#include "foundation/bytes.h"
 #include "verify/check.h"
 
 namespace pinwell::verify {

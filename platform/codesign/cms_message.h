@@ -19,6 +19,7 @@
 #include <vector>
 
 #include "codesign/ber.h"
+#include "foundation/bytes.h"
 
 namespace pinwell::codesign {
 

@@ -13,6 +13,7 @@
 #include <optional>
 
 #include "codesign/code_signing.h"
+#include "foundation/bytes.h"
 
 namespace pinwell::codesign {
 

@@ -7,6 +7,7 @@
 #pragma once
 
 #include "codesign/cms_message.h"
+#include "foundation/bytes.h"
 #include "foundation/date.h"
 
 namespace pinwell::codesign {

@@ -7,6 +7,7 @@
 #include "foundation/file_io.h"
 #include "foundation/json.h"
 #include "foundation/process.h"
+#include "foundation/value.h"
 
 namespace pinwell::defaults {
 namespace {

@@ -5,7 +5,7 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/value.h"
+#include "foundation/value_fwd.h"
 
 namespace pinwell::defaults {
 

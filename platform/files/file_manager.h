@@ -13,9 +13,11 @@
 #include <string>
 
 #include "files/file_reader.h"
+#include "foundation/bytes.h"
 #include "foundation/error.h"
 #include "foundation/places.h"
 #include "foundation/url.h"
+#include "foundation/value_fwd.h"
 
 namespace pinwell::files {
 

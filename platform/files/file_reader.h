@@ -8,6 +8,7 @@
 #include <stdexcept>
 #include <string>
 
+#include "foundation/bytes.h"
 #include "foundation/error.h"
 
 namespace pinwell::files {

@@ -1,4 +1,5 @@
 #include "files/item_properties.h"
+#include "foundation/value.h"
 
 namespace pinwell::files {
 

@@ -12,6 +12,7 @@
 #include <utility>
 
 #include "files/file_manager.h"
+#include "foundation/bytes.h"
 #include "foundation/file_io.h"
 #include "foundation/places.h"
 

@@ -8,6 +8,7 @@
 #include <memory>
 
 #include "foundation/lazy_library.h"
+#include "foundation/value.h"
 
 namespace pinwell::files {
 namespace {

@@ -9,9 +9,11 @@
 #include <memory>
 #include <string_view>
 
+#include "foundation/bytes.h"
 #include "foundation/file_io.h"
 #include "foundation/property_list.h"
 #include "foundation/url.h"
+#include "foundation/value.h"
 
 namespace pinwell::foundation {
 namespace {

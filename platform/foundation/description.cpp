@@ -5,6 +5,7 @@
 #include <algorithm>
 
 #include "foundation/utf8.h"
+#include "foundation/value.h"
 
 namespace pinwell::foundation {
 namespace {
@@ -189,6 +190,16 @@ std::string Value::describe(unsigned indent) const {
         }
     };
     return std::visit(Visitor{indent}, content_);
+}
+
+std::string Description<Value>::of(const Value& value) {
+    return describe(value);
+}
+std::string Description<Array>::of(const Array& array) {
+    return describe(array);
+}
+std::string Description<Dictionary>::of(const Dictionary& dictionary) {
+    return describe(dictionary);
 }
 
 }  // namespace pinwell::foundation

@@ -24,7 +24,7 @@
 #include "foundation/date.h"
 #include "foundation/error.h"
 #include "foundation/url.h"
-#include "foundation/value.h"
+#include "foundation/value_fwd.h"
 
 namespace pinwell::foundation {
 
@@ -93,15 +93,15 @@ struct Description<Error> {
 };
 template <>
 struct Description<Value> {
-    static std::string of(const Value& value) { return describe(value); }
+    static std::string of(const Value& value);
 };
 template <>
 struct Description<Array> {
-    static std::string of(const Array& array) { return describe(array); }
+    static std::string of(const Array& array);
 };
 template <>
 struct Description<Dictionary> {
-    static std::string of(const Dictionary& dictionary) { return describe(dictionary); }
+    static std::string of(const Dictionary& dictionary);
 };
 
 template <class T>

@@ -4,6 +4,8 @@
 
 #include <cstring>
 
+#include "foundation/value.h"
+
 namespace pinwell::foundation {
 namespace {
 
@@ -18,8 +20,8 @@ std::string_view statusText(std::int32_t status) {
 
 }  // namespace
 
-Error::Error(std::string_view domain, std::int64_t code, std::string text, Dictionary userInfo)
-    : domain_(domain), code_(code), text_(std::move(text)), userInfo_(std::move(userInfo)) {}
+Error::Error(std::string_view domain, std::int64_t code, std::string text)
+    : domain_(domain), code_(code), text_(std::move(text)) {}
 
 Error Error::posix(int number, std::string_view path) {
     // Not strerror: this one is neither translated nor shared between threads.
@@ -35,15 +37,27 @@ Error Error::osStatus(std::int32_t status) {
             text.empty() ? fmt::format("Status {}.", status) : std::string(text)};
 }
 
+const Dictionary& Error::userInfo() const noexcept {
+    static const Dictionary none;
+    return userInfo_ == nullptr ? none : *userInfo_;
+}
+
 std::string Error::localizedDescription() const {
-    const auto path = userInfo_.find(kFilePathKey);
-    if (path == userInfo_.end() || path->second.string() == nullptr) return text_;
+    const auto path = userInfo().find(kFilePathKey);
+    if (path == userInfo().end() || path->second.string() == nullptr) return text_;
     return *path->second.string() + ": " + text_;
 }
 
-Error Error::with(std::string_view key, Value value) && {
-    userInfo_.insert_or_assign(std::string(key), std::move(value));
+Error Error::with(std::string_view key, const Value& value) && {
+    Dictionary more = userInfo();
+    more.insert_or_assign(std::string(key), value);
+    userInfo_ = std::make_shared<const Dictionary>(std::move(more));
     return std::move(*this);
+}
+
+bool Error::operator==(const Error& other) const {
+    return domain_ == other.domain_ && code_ == other.code_ && text_ == other.text_ &&
+           userInfo() == other.userInfo();
 }
 
 }  // namespace pinwell::foundation

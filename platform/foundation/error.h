@@ -9,7 +9,7 @@
 #include <utility>
 #include <variant>
 
-#include "foundation/value.h"
+#include "foundation/value_fwd.h"
 
 namespace pinwell::foundation {
 
@@ -35,7 +35,7 @@ inline constexpr std::int32_t kParameterError = -50;
 /// Why something failed. A value; an error that may be missing is a `std::optional<Error>`.
 class Error {
   public:
-    Error(std::string_view domain, std::int64_t code, std::string text, Dictionary userInfo = {});
+    Error(std::string_view domain, std::int64_t code, std::string text);
 
     /// An errno value, with the path it concerns.
     static Error posix(int number, std::string_view path = {});
@@ -52,18 +52,19 @@ class Error {
     /// The bare reason, without what it concerns.
     const std::string& localizedFailureReason() const noexcept { return text_; }
 
-    const Dictionary& userInfo() const noexcept { return userInfo_; }
+    /// What else is known. Whoever reads it includes foundation/value.h.
+    const Dictionary& userInfo() const noexcept;
 
-    /// The same error with one more entry of user information.
-    Error with(std::string_view key, Value value) &&;
+    /// The same error with one more entry of user information. Whoever calls it includes foundation/value.h.
+    Error with(std::string_view key, const Value& value) &&;
 
-    bool operator==(const Error&) const = default;
+    bool operator==(const Error& other) const;
 
   private:
     std::string domain_;
     std::int64_t code_;
     std::string text_;
-    Dictionary userInfo_;
+    std::shared_ptr<const Dictionary> userInfo_;  // null while there is none
 };
 
 /// Either a value or the error that kept it from being made.

@@ -1,4 +1,5 @@
 #include "foundation/file_io.h"
+#include "foundation/bytes.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>

@@ -4,6 +4,7 @@
 #include <string>
 #include <utility>
 
+#include "foundation/bytes.h"
 #include "foundation/error.h"
 
 namespace pinwell::foundation {

@@ -1,4 +1,6 @@
 #include "foundation/json.h"
+#include "foundation/bytes.h"
+#include "foundation/value.h"
 
 #include <fmt/format.h>
 

@@ -1,7 +1,9 @@
 // JSON (RFC 8259) in and out.
 #pragma once
 
+#include "foundation/bytes.h"
 #include "foundation/error.h"
+#include "foundation/value_fwd.h"
 
 namespace pinwell::foundation {
 

@@ -8,9 +8,11 @@
 #include <filesystem>
 #include <system_error>
 
+#include "foundation/bytes.h"
 #include "foundation/file_io.h"
 #include "foundation/json.h"
 #include "foundation/process.h"
+#include "foundation/value.h"
 
 namespace pinwell::foundation {
 namespace {

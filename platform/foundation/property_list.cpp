@@ -8,8 +8,10 @@
 
 #include "foundation/base64.h"
 #include "foundation/byte_reader.h"
+#include "foundation/bytes.h"
 #include "foundation/property_list_reader.h"
 #include "foundation/utf8.h"
+#include "foundation/value.h"
 
 namespace pinwell::foundation {
 namespace {

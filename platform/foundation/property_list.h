@@ -1,7 +1,9 @@
 // Property lists, in the XML and the binary form.
 #pragma once
 
+#include "foundation/bytes.h"
 #include "foundation/error.h"
+#include "foundation/value_fwd.h"
 
 namespace pinwell::foundation {
 

@@ -5,6 +5,7 @@
 #include <stdexcept>
 #include <string>
 
+#include "foundation/bytes.h"
 #include "foundation/error.h"
 #include "foundation/value.h"
 

@@ -2,25 +2,20 @@
 #pragma once
 
 #include <cstdint>
-#include <map>
 #include <memory>
 #include <stdexcept>
 #include <string>
 #include <string_view>
 #include <variant>
-#include <vector>
 
 #include "foundation/bytes.h"
 #include "foundation/date.h"
 #include "foundation/url.h"
+#include "foundation/value_fwd.h"
 
 namespace pinwell::foundation {
 
 class Error;
-class Value;
-
-using Array = std::vector<Value>;
-using Dictionary = std::map<std::string, Value, std::less<>>;
 
 /// A value was asked for something its kind does not have (an element of a string, say).
 class ValueTypeError : public std::runtime_error {

@@ -1,6 +1,7 @@
 // Where the body of a response goes.
 #pragma once
 
+#include "foundation/bytes.h"
 #include "https/session.h"
 
 namespace pinwell::https {

@@ -3,6 +3,7 @@
 #include <mutex>
 #include <optional>
 
+#include "foundation/value.h"
 #include "https/transfer_error.h"
 
 namespace pinwell::https {

@@ -8,6 +8,8 @@
 #include <mutex>
 #include <set>
 
+#include "foundation/bytes.h"
+#include "foundation/value.h"
 #include "https/transfer_error.h"
 
 namespace pinwell::https {

@@ -3,6 +3,7 @@
 
 #include <memory>
 
+#include "foundation/bytes.h"
 #include "foundation/file_io.h"
 #include "https/body_sink.h"
 

@@ -15,8 +15,10 @@
 #include <optional>
 #include <string>
 
+#include "foundation/bytes.h"
 #include "foundation/description.h"
 #include "foundation/serial_queue.h"
+#include "foundation/url.h"
 #include "trust/trust.h"
 
 namespace pinwell::https {

@@ -7,7 +7,9 @@
 #include <cstring>
 #include <system_error>
 
+#include "foundation/bytes.h"
 #include "foundation/handle.h"
+#include "foundation/value.h"
 #include "https/field_syntax.h"
 #include "https/redirect.h"
 #include "https/response_head.h"

@@ -16,6 +16,7 @@
 #include <string>
 #include <string_view>
 
+#include "foundation/bytes.h"
 #include "foundation/date.h"
 #include "trust/der.h"
 

@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "trust/der_cursor.h"
 
 namespace pinwell::trust {

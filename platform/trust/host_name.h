@@ -5,6 +5,7 @@
 #include <optional>
 #include <string_view>
 
+#include "foundation/bytes.h"
 #include "trust/general_name.h"
 
 namespace pinwell::trust {

@@ -6,6 +6,7 @@
 #include <memory>
 #include <optional>
 
+#include "foundation/value.h"
 #include "trust/include/pinwell/ostrel_security.h"
 
 namespace pinwell::trust {

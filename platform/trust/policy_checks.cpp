@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "foundation/date.h"
 #include "foundation/format.h"
 #include "trust/host_name.h"
 

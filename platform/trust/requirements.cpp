@@ -4,6 +4,7 @@
 #include <array>
 
 #include "foundation/format.h"
+#include "foundation/value.h"
 
 namespace pinwell::trust {
 namespace {

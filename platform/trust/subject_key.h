@@ -19,6 +19,7 @@
 #include <string>
 #include <string_view>
 
+#include "foundation/bytes.h"
 #include "trust/signature_algorithm.h"
 
 namespace pinwell::trust {

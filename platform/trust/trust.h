@@ -17,6 +17,7 @@
 #include "foundation/date.h"
 #include "foundation/error.h"
 #include "foundation/platform_directory.h"
+#include "foundation/value.h"
 
 namespace pinwell::trust {
 

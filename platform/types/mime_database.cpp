@@ -6,6 +6,7 @@
 #include <memory>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "foundation/file_io.h"
 #include "foundation/lazy_library.h"
 

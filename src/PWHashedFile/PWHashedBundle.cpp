@@ -2,6 +2,7 @@
 
 #include "foundation/process.h"
 #include "foundation/signal_deferral.h"
+#include "foundation/value.h"
 #include "src/cdhash_extract.h"
 #include "src/messages.h"
 

@@ -2,6 +2,7 @@
 
 #include <utility>
 
+#include "foundation/value.h"
 #include "src/PWHashedFile/synthetic_cdhash.h"
 #include "src/cdhash_extract.h"
 #include "src/messages.h"

@@ -6,6 +6,7 @@
 // the ticket does not change.
 #pragma once
 
+#include "foundation/bytes.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/PWHashedFile/disk_image_signature.h"
 

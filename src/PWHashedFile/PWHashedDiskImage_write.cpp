@@ -4,7 +4,9 @@
 #include <limits>
 #include <utility>
 
+#include "foundation/bytes.h"
 #include "foundation/process.h"
+#include "foundation/url.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/messages.h"
 

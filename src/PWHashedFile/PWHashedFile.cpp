@@ -1,6 +1,7 @@
 #include "src/PWHashedFile/PWHashedFile.h"
 
 #include "foundation/signal_deferral.h"
+#include "foundation/value.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"

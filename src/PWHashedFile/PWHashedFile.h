@@ -11,6 +11,7 @@
 #include <string>
 #include <string_view>
 
+#include "foundation/bytes.h"
 #include "foundation/error.h"
 #include "foundation/url.h"
 #include "src/PWHashedFile/file_kind.h"

@@ -5,6 +5,7 @@
 // know are kept: those behind the old ticket move in front of the new one, all others stay where they are.
 #pragma once
 
+#include "foundation/bytes.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/PWHashedFile/package_trailer_walk.h"
 

@@ -2,7 +2,9 @@
 #include <cerrno>
 #include <utility>
 
+#include "foundation/bytes.h"
 #include "foundation/process.h"
+#include "foundation/url.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "src/PWHashedFile/package_trailer.h"
 #include "src/messages.h"

@@ -21,6 +21,7 @@
 #include <string_view>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "foundation/value.h"
 
 namespace pinwell {

@@ -1,5 +1,6 @@
 #include "src/PWHashedFile/synthetic_cdhash.h"
 
+#include "foundation/value.h"
 #include "src/messages.h"
 
 namespace pinwell {

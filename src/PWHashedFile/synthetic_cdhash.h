@@ -8,6 +8,8 @@
 #include <cstdint>
 #include <optional>
 
+#include "foundation/bytes.h"
+#include "foundation/url.h"
 #include "src/platform.h"
 
 namespace pinwell {

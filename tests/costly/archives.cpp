@@ -5,6 +5,7 @@
 
 #include "costly_input.h"
 #include "foundation/byte_writer.h"
+#include "foundation/bytes.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "support/archive_builder.h"
 #include "support/temporary_directory.h"

@@ -1,6 +1,8 @@
 // JSON: answers of the service, platform.json, user defaults.
 #include "foundation/json.h"
 #include "costly_input.h"
+#include "foundation/bytes.h"
+#include "foundation/value.h"
 
 namespace pinwell::test {
 namespace {

@@ -1,7 +1,9 @@
 // Property lists, in XML and in the binary form: the Info.plist of a bundle.
 #include "costly_input.h"
 #include "foundation/byte_writer.h"
+#include "foundation/bytes.h"
 #include "foundation/property_list.h"
+#include "foundation/value.h"
 
 namespace pinwell::test {
 namespace {

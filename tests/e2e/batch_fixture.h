@@ -12,6 +12,7 @@
 
 #include "artefacts.h"
 #include "fixture.h"
+#include "foundation/bytes.h"
 #include "foundation/value.h"
 
 namespace pinwell::test {

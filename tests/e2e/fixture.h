@@ -18,6 +18,7 @@
 #include <string>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "support/certificate_builder.h"
 #include "support/code_directory_builder.h"
 #include "support/executable_image_builder.h"

@@ -6,6 +6,7 @@
 #include <ostream>
 
 #include "foundation/json.h"
+#include "foundation/value.h"
 #include "local_service.h"
 #include "support/file_properties.h"
 

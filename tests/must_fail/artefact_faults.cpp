@@ -4,6 +4,7 @@
 
 #include "e2e/artefacts.h"
 #include "foundation/byte_writer.h"
+#include "foundation/bytes.h"
 #include "support/archive_builder.h"
 #include "support/disk_image_builder.h"
 #include "support/executable_image_builder.h"

@@ -5,6 +5,7 @@
 #include <string_view>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "support/certificate_builder.h"
 #include "unit/trust/scene.h"
 

@@ -8,6 +8,7 @@
 #include <tuple>
 
 #include "e2e/artefacts.h"
+#include "foundation/bytes.h"
 #include "result_table.h"
 #include "subjects.h"
 #include "support/code_directory_builder.h"

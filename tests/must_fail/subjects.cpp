@@ -5,6 +5,7 @@
 #include <stdexcept>
 
 #include "e2e/artefacts.h"
+#include "foundation/date.h"
 #include "src/DownloadDelegate.h"
 #include "support/code_directory_builder.h"
 #include "support/controller_run.h"

@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "support/test_platform.h"
 #include "support/ticket_builder.h"
 #include "trust/trust_service.h"

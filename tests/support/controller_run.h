@@ -6,6 +6,8 @@
 #include <optional>
 #include <string>
 
+#include "foundation/bytes.h"
+#include "foundation/url.h"
 #include "src/DownloadDelegate.h"
 #include "support/test_platform.h"
 

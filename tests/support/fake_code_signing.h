@@ -4,6 +4,8 @@
 #include <optional>
 
 #include "codesign/code_signing.h"
+#include "foundation/bytes.h"
+#include "foundation/url.h"
 
 namespace pinwell::test {
 

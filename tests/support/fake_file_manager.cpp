@@ -11,6 +11,8 @@
 #include <ostream>
 #include <utility>
 
+#include "foundation/bytes.h"
+#include "foundation/url.h"
 #include "support/temporary_directory.h"
 
 namespace pinwell::test {

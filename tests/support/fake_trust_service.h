@@ -17,6 +17,7 @@
 #include <utility>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "trust/trust.h"
 
 namespace pinwell::test {

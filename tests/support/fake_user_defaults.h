@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "defaults/user_defaults.h"
+#include "foundation/value.h"
 
 namespace pinwell::test {
 

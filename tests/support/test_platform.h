@@ -7,6 +7,7 @@
 
 #include <optional>
 
+#include "foundation/bytes.h"
 #include "foundation/platform_directory.h"
 #include "src/platform.h"
 #include "support/fake_code_signing.h"

@@ -11,6 +11,7 @@
 #include <map>
 
 #include "foundation/format.h"
+#include "foundation/url.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/host_platform.h"
 #include "stapling.h"

@@ -5,6 +5,7 @@
 #include "foundation/description.h"
 #include "foundation/json.h"
 #include "foundation/property_list.h"
+#include "foundation/value.h"
 #include "support/text.h"
 
 namespace pinwell::test {

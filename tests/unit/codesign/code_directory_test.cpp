@@ -5,6 +5,7 @@
 #include "codesign/code_error.h"
 #include "foundation/byte_reader.h"
 #include "foundation/byte_writer.h"
+#include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "support/code_directory_builder.h"
 

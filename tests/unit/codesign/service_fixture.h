@@ -9,6 +9,8 @@
 #include <vector>
 
 #include "codesign/service.h"
+#include "foundation/bytes.h"
+#include "foundation/url.h"
 #include "support/executable_image_builder.h"
 #include "support/temporary_directory.h"
 

@@ -10,6 +10,7 @@
 
 #include "files/file_manager.h"
 #include "fixture.h"
+#include "foundation/url.h"
 #include "support/fake_file_manager.h"
 #include "support/volume.h"
 

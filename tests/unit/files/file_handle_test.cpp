@@ -5,6 +5,7 @@
 #include <limits>
 
 #include "fixture.h"
+#include "foundation/url.h"
 #include "support/file_size_limit.h"
 #include "support/volume.h"
 

@@ -12,6 +12,7 @@
 
 #include "fixture.h"
 #include "foundation/file_io.h"
+#include "foundation/url.h"
 #include "support/volume.h"
 
 namespace pinwell::test {

@@ -1,6 +1,7 @@
 #include <cstdlib>
 
 #include "fixture.h"
+#include "foundation/value.h"
 
 namespace pinwell::test {
 namespace {

@@ -4,6 +4,7 @@
 #include <filesystem>
 
 #include "fixture.h"
+#include "foundation/value.h"
 #include "support/volume.h"
 
 #if defined(__has_feature)

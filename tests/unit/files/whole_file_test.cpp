@@ -1,6 +1,7 @@
 #include <unistd.h>
 
 #include "fixture.h"
+#include "foundation/url.h"
 
 namespace pinwell::test {
 namespace {

@@ -7,6 +7,7 @@
 #include <stdexcept>
 
 #include "foundation/property_list.h"
+#include "foundation/value.h"
 #include "support/temporary_directory.h"
 
 namespace pinwell::foundation {

@@ -2,7 +2,11 @@
 
 #include <gtest/gtest.h>
 
+#include "foundation/bytes.h"
+#include "foundation/date.h"
+#include "foundation/url.h"
 #include "foundation/utf8.h"
+#include "foundation/value.h"
 
 namespace pinwell::foundation {
 namespace {

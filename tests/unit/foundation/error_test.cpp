@@ -4,6 +4,8 @@
 
 #include <cerrno>
 
+#include "foundation/value.h"
+
 namespace pinwell::foundation {
 namespace {
 

@@ -10,6 +10,7 @@
 #include <cerrno>
 #include <filesystem>
 
+#include "foundation/value.h"
 #include "support/temporary_directory.h"
 
 namespace pinwell::foundation {

@@ -1,4 +1,6 @@
 #include "foundation/format.h"
+#include "foundation/url.h"
+#include "foundation/value.h"
 
 #include <gtest/gtest.h>
 

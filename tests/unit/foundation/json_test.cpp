@@ -6,6 +6,9 @@
 #include <cmath>
 #include <limits>
 
+#include "foundation/date.h"
+#include "foundation/url.h"
+#include "foundation/value.h"
 #include "support/text.h"
 
 namespace pinwell::foundation {

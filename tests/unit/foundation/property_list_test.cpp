@@ -8,6 +8,9 @@
 #include <limits>
 
 #include "foundation/byte_writer.h"
+#include "foundation/bytes.h"
+#include "foundation/date.h"
+#include "foundation/value.h"
 #include "support/text.h"
 
 namespace pinwell::foundation {

@@ -5,6 +5,7 @@
 #include <memory>
 
 #include "foundation/run_loop.h"
+#include "foundation/url.h"
 #include "https/session.h"
 #include "support/fake_trust_service.h"
 

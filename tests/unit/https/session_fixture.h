@@ -8,6 +8,8 @@
 #include <future>
 #include <thread>
 
+#include "foundation/bytes.h"
+#include "foundation/url.h"
 #include "https/session_options.h"
 #include "support/certificate_builder.h"
 #include "support/fake_trust_service.h"

@@ -1,6 +1,7 @@
 // What is found out about artefacts of every kind whose tickets are whole.
 #include <cerrno>
 
+#include "foundation/bytes.h"
 #include "inspect_fixture.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "support/disk_image_builder.h"

@@ -2,6 +2,7 @@
 #include "inspect/render_json.h"
 
 #include "foundation/json.h"
+#include "foundation/value.h"
 #include "inspect_fixture.h"
 
 namespace pinwell::test {

@@ -3,6 +3,7 @@
 #include <filesystem>
 
 #include "foundation/json.h"
+#include "foundation/value.h"
 #include "running_service.h"
 #include "support/environment.h"
 

@@ -5,7 +5,10 @@
 #include <map>
 
 #include "foundation/byte_reader.h"
+#include "foundation/bytes.h"
+#include "foundation/date.h"
 #include "foundation/json.h"
+#include "foundation/value.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/service_directory.h"
 #include "lumora-local/sqlite_store.h"

@@ -5,7 +5,9 @@
 #include <stdexcept>
 
 #include "foundation/base64.h"
+#include "foundation/bytes.h"
 #include "foundation/json.h"
+#include "foundation/value.h"
 
 namespace pinwell::lumora {
 namespace {

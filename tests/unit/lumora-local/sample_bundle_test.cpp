@@ -8,7 +8,9 @@
 
 #include "foundation/bundle.h"
 #include "foundation/byte_reader.h"
+#include "foundation/bytes.h"
 #include "foundation/property_list.h"
+#include "foundation/value.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/sha256.h"
 #include "support/temporary_directory.h"

@@ -8,7 +8,9 @@
 #include <thread>
 
 #include "foundation/base64.h"
+#include "foundation/bytes.h"
 #include "foundation/json.h"
+#include "foundation/value.h"
 #include "running_service.h"
 
 namespace pinwell::lumora {

@@ -6,7 +6,9 @@
 #include <cerrno>
 #include <filesystem>
 
+#include "foundation/bytes.h"
 #include "foundation/process.h"
+#include "foundation/url.h"
 #include "src/messages.h"
 #include "support/message_capture.h"
 #include "support/test_platform.h"

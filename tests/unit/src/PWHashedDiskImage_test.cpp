@@ -7,7 +7,9 @@
 
 #include "disk_image_fixture.h"
 #include "foundation/byte_writer.h"
+#include "foundation/bytes.h"
 #include "foundation/process.h"
+#include "foundation/value.h"
 #include "src/cdhash_extract.h"
 
 namespace pinwell {

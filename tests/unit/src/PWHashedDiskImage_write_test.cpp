@@ -7,6 +7,9 @@
 
 #include "disk_image_fixture.h"
 #include "foundation/byte_writer.h"
+#include "foundation/bytes.h"
+#include "foundation/url.h"
+#include "foundation/value.h"
 
 namespace pinwell {
 namespace {

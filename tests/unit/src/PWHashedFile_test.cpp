@@ -10,6 +10,8 @@
 #include <functional>
 #include <thread>
 
+#include "foundation/bytes.h"
+#include "foundation/url.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/messages.h"
 #include "support/message_capture.h"

@@ -3,6 +3,7 @@
 
 #include <filesystem>
 
+#include "foundation/bytes.h"
 #include "package_fixture.h"
 #include "src/DownloadDelegate.h"
 #include "support/archive_builder.h"

@@ -3,6 +3,7 @@
 
 #include <filesystem>
 
+#include "foundation/url.h"
 #include "package_fixture.h"
 #include "src/PWHashedFile/package_trailer_walk.h"
 #include "support/archive_builder.h"

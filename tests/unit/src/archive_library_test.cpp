@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "package_fixture.h"
 
 namespace pinwell::test {

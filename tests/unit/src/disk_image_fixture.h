@@ -6,6 +6,8 @@
 
 #include <filesystem>
 
+#include "foundation/bytes.h"
+#include "foundation/url.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/messages.h"
 #include "support/disk_image_builder.h"

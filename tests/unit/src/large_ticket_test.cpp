@@ -7,6 +7,9 @@
 #include <filesystem>
 #include <utility>
 
+#include "foundation/bytes.h"
+#include "foundation/url.h"
+#include "foundation/value.h"
 #include "src/messages.h"
 #include "support/controller_run.h"
 #include "support/message_capture.h"

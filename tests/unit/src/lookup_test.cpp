@@ -4,7 +4,9 @@
 #include <filesystem>
 
 #include "foundation/base64.h"
+#include "foundation/bytes.h"
 #include "foundation/json.h"
+#include "foundation/value.h"
 #include "src/messages.h"
 #include "support/controller_run.h"
 #include "support/message_capture.h"

@@ -5,6 +5,7 @@
 
 #include <string>
 
+#include "foundation/url.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "src/messages.h"
 #include "support/message_capture.h"

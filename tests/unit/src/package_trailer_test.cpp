@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include "foundation/bytes.h"
 #include "src/messages.h"
 #include "support/message_capture.h"
 #include "support/package_builder.h"

@@ -3,6 +3,7 @@
 #include <limits>
 #include <span>
 
+#include "foundation/bytes.h"
 #include "src/satchel.h"
 #include "support/ticket_builder.h"
 

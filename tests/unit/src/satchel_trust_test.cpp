@@ -4,6 +4,8 @@
 #include <memory>
 #include <stdexcept>
 
+#include "foundation/bytes.h"
+#include "foundation/date.h"
 #include "src/satchel.h"
 #include "src/satchel_internal.h"
 #include "src/tm_ticket.h"

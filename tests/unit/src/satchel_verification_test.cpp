@@ -5,6 +5,7 @@
 
 #include <new>
 
+#include "foundation/bytes.h"
 #include "src/satchel.h"
 #include "src/satchel_internal.h"
 #include "src/tm_ticket.h"

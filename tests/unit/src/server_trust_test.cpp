@@ -1,6 +1,7 @@
 // Which servers the controller lets answer.
 #include <gtest/gtest.h>
 
+#include "foundation/value.h"
 #include "src/messages.h"
 #include "support/controller_run.h"
 #include "support/message_capture.h"

@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include "foundation/bytes.h"
+#include "foundation/url.h"
 #include "src/messages.h"
 #include "support/disk_image_builder.h"
 #include "support/message_capture.h"

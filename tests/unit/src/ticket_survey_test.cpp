@@ -2,6 +2,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "foundation/bytes.h"
 #include "src/satchel.h"
 #include "src/satchel_internal.h"
 #include "src/tm_ticket.h"

@@ -6,6 +6,7 @@
 #include <span>
 
 #include "foundation/byte_writer.h"
+#include "foundation/bytes.h"
 #include "support/ticket_builder.h"
 
 namespace pinwell {
