@@ -12,7 +12,7 @@ bounded() {
   local status=0
   setsid timeout --signal=KILL "$@" < /dev/null &
   running=$!
-  wait $running || status=$?
+  { wait $running; } 2> /dev/null || status=$?  # the shell would tell that it was killed
   running=
   return $status
 }
