@@ -271,6 +271,25 @@ void makeDocuments(const std::string& corpus) {
         .add("root", TicketChain().issue().root.pem());
 }
 
+/// The first byte says which file of an artefact the rest is (fuzz/c_interface.cpp).
+void makeFilesOfArtefacts(const std::string& corpus) {
+    const std::string artefacts = VECTORS_DIRECTORY "/artefacts/";
+    Seeds seeds(corpus, "c_interface");
+    const auto add = [&](const std::string& name, char place, const std::string& contents) {
+        seeds.add(name, place + contents);
+    };
+    add("image", 0, readFile(artefacts + "Sample.dmg"));
+    add("image_unsigned", 0, readFile(artefacts + "bare/Unsigned.dmg"));
+    add("package", 1, readFile(artefacts + "Sample.pkg"));
+    add("executable", 2, foundation::toString(ExecutableImageBuilder().build()));
+    add("ticket", 3, readFile(artefacts + "Sample.app/Contents/CodeResources"));
+    add("ticket_revoked", 3, readFile(VECTORS_DIRECTORY "/tickets/revoked-app.ticket"));
+    add("seal", 4, readFile(artefacts + "Sample.app/Contents/_CodeSignature/CodeResources"));
+    add("property_list", 5, readFile(artefacts + "Sample.app/Contents/Info.plist"));
+    add("main_executable", 6, foundation::toString(ExecutableImageBuilder().build()));
+    add("roots", 7, readFile(VECTORS_DIRECTORY "/platform/roots/sample.pem"));
+}
+
 }  // namespace
 }  // namespace pinwell::test
 
@@ -282,8 +301,9 @@ int main(int argc, char** argv) {
     }
     try {
         const std::string corpus = argv[1];
-        for (const auto make : {makeTickets, makeCertificateBlocks, makeSuperblobs, makeCodeSignatures,
-                                makeMessages, makeExecutables, makeArchives, makeDocuments})
+        for (const auto make :
+             {makeTickets, makeCertificateBlocks, makeSuperblobs, makeCodeSignatures, makeMessages,
+              makeExecutables, makeArchives, makeDocuments, makeFilesOfArtefacts})
             make(corpus);
         return 0;
     } catch (const std::exception& failure) {
