@@ -27,7 +27,17 @@ std::size_t alive = 0;
 // Whether a deferral is alive, for the handler, which may not wait for the mutex.
 std::atomic<bool> deferring = false;
 
+// This thread takes the signal, before it goes on: of a process with several, kill(2) may choose another one,
+// and that one may come too late.
 void passOn(std::size_t i) {
+    if (arrived.at(i).exchange(false)) raise(kDeferred.at(i));
+}
+
+// What this thread blocks is for others to take.
+void passOnFromOutside(std::size_t i) {
+    sigset_t blocked;
+    pthread_sigmask(SIG_BLOCK, nullptr, &blocked);
+    if (sigismember(&blocked, kDeferred.at(i)) == 0) return passOn(i);
     if (arrived.at(i).exchange(false)) kill(getpid(), kDeferred.at(i));
 }
 
@@ -40,7 +50,7 @@ void note(int number) {
     for (std::size_t i = 0; i < kDeferred.size(); ++i) {
         if (kDeferred.at(i) != number) continue;
         arrived.at(i) = true;
-        if (!deferring) passOn(i);
+        if (!deferring) passOn(i);  // it comes when the handler returns
     }
     errno = error;
 }
@@ -71,7 +81,7 @@ SignalDeferral::~SignalDeferral() {
     }
     // Without the lock: what the signal starts may take its time. A deferral that began meanwhile puts the
     // signal off once more.
-    for (std::size_t i = 0; i < kDeferred.size(); ++i) passOn(i);
+    for (std::size_t i = 0; i < kDeferred.size(); ++i) passOnFromOutside(i);
 }
 
 }  // namespace pinwell::foundation

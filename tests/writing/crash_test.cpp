@@ -293,7 +293,7 @@ class ChangedWhileRead : public Crash {
                 clear();
                 writeFile(artefact.path, artefact.contents);
                 const TracedRun run = interruptRun(command({"staple", artefact.path}), calls, number,
-                                                   [&](int) { change(artefact.path); });
+                                                   [&](int, int) { change(artefact.path); });
                 if (!run.interruptedAt) break;
                 ++changes;
                 SCOPED_TRACE(foundation::format("%@ at call %lu, %@", made.name, number, *run.interruptedAt));

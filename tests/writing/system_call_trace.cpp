@@ -204,7 +204,7 @@ class Trace {
         if (calls_.changesOnly && !changes) return;
         if (seen_++ != number_) return;
         result_.interruptedAt = call->name;
-        interruption_(process_);
+        interruption_(process_, thread);
     }
 
     // O_DIRECTORY is part of O_TMPFILE.
@@ -243,7 +243,7 @@ class Trace {
 }  // namespace
 
 Interruption sending(int signal) {
-    return [signal](int process) { kill(process, signal); };
+    return [signal](int process, int thread) { tgkill(process, thread, signal); };
 }
 
 TracedRun interruptRun(const Command& command, const TracedCalls& calls, std::size_t number,

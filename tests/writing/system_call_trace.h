@@ -29,8 +29,12 @@ struct TracedRun {
     int signal = 0;
 };
 
-/// What happens; it is given the number of the process, which stands still or waits elsewhere.
-using Interruption = std::function<void(int process)>;
+/// What happens; it is given the number of the process and of its thread that stands still at the call. The
+/// other threads go on.
+using Interruption = std::function<void(int process, int thread)>;
+
+/// The signal comes to the thread at the call. Sent to the process, the kernel might choose another thread: a
+/// traced one takes it when it gets a processor, and until then the first may reach the end of the program.
 Interruption sending(int signal);
 
 /// Runs the command (its outputs go nowhere) and interrupts it at the call of that number, counted from 0.

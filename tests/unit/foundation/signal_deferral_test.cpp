@@ -61,6 +61,35 @@ TEST_F(Deferral, HoldsForSignalsThatAnotherThreadTakes) {
     EXPECT_EQ(taken, 1);
 }
 
+TEST_F(Deferral, LetsASignalHaveItsEffectInTheThreadThatEndsIt) {
+    static std::atomic<pid_t> taker;
+    taker = 0;
+    std::signal(SIGTERM, [](int) { taker = gettid(); });
+    std::thread([] {
+        std::optional<SignalDeferral> deferral(std::in_place);
+        pthread_kill(pthread_self(), SIGTERM);
+        deferral.reset();
+        EXPECT_EQ(taker, gettid());
+    }).join();
+}
+
+TEST_F(Deferral, LeavesASignalToOthersIfTheThreadThatEndsItBlocksIt) {
+    std::optional<SignalDeferral> deferral(std::in_place);
+    send(SIGTERM);
+    std::thread([&] {
+        sigset_t blocked;
+        sigemptyset(&blocked);
+        sigaddset(&blocked, SIGTERM);
+        pthread_sigmask(SIG_BLOCK, &blocked, nullptr);
+        deferral.reset();
+        sigset_t kept;
+        sigpending(&kept);
+        EXPECT_EQ(sigismember(&kept, SIGTERM), 0) << "the signal waits for a thread that does not take it";
+    }).join();
+    while (taken == 0) std::this_thread::yield();  // this thread is told, and takes it when it next can
+    EXPECT_EQ(taken, 1);
+}
+
 TEST_F(Deferral, OfSeveralTheLastOneLetsSignalsThrough) {
     std::optional<SignalDeferral> first(std::in_place);
     std::optional<SignalDeferral> second(std::in_place);
