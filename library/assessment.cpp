@@ -3,6 +3,7 @@
 #include <pthread.h>
 
 #include <csignal>
+#include <memory>
 #include <utility>
 
 #include "library/local_platform.h"

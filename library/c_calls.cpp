@@ -2,11 +2,9 @@
 
 #include <pthread.h>
 
-#include <algorithm>
 #include <atomic>
 #include <cstring>
 #include <string_view>
-#include <utility>
 
 #include "foundation/description.h"
 #include "library/handles.h"

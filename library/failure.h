@@ -3,6 +3,7 @@
 
 #include <cstdint>
 #include <string>
+#include <utility>
 
 #include "foundation/error.h"
 #include "pinwell/ticket.h"

@@ -4,11 +4,11 @@
 // freed, or with one of another type, is found out here. It is odd, as no address of an object is.
 #pragma once
 
-#include <atomic>
 #include <cstdint>
 #include <memory>
 #include <mutex>
 #include <unordered_map>
+#include <utility>
 
 namespace pinwell::library {
 
