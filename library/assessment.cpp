@@ -94,16 +94,16 @@ class Assessor {
     }
 
   private:
-    void atLeast(pinwell_verdict verdict, const char* reason) {
+    void atLeast(pinwell_verdict verdict, std::string reason) {
         if (verdict <= found_.verdict) return;
         found_.verdict = verdict;
-        found_.reason = reason;
+        found_.reason = std::move(reason);
     }
 
     bool open() {
         verify::OpenedArtefact opened = verify::openArtefact(url_, services_);
         if (opened.file == nullptr) {
-            atLeast(PINWELL_VERDICT_UNREADABLE, opened.problem.c_str());
+            atLeast(PINWELL_VERDICT_UNREADABLE, opened.problem);
             checks_.cannotRead(verify::kArtefact, {}, opened.problem);
             return false;
         }
@@ -169,8 +169,14 @@ class Assessor {
         if (judged_->isGenuine() && judged_->isRevoked())
             atLeast(PINWELL_VERDICT_REVOKED, "Its ticket revokes it: it must not run.");
         else
-            atLeast(PINWELL_VERDICT_REFUSED, "Its ticket is not acceptable.");
+            atLeast(PINWELL_VERDICT_REFUSED, "Its ticket is not acceptable: " + faultOfTicket() + ".");
         return false;
+    }
+
+    std::string faultOfTicket() const {
+        if (!judged_->isGenuine()) return judged_->fault();
+        return found_.codeHash ? "it does not list this artefact"
+                               : "the artefact has no hash that a ticket could list";
     }
 
     void takeOutcome(Outcome worst) {

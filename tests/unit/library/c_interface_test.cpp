@@ -14,6 +14,7 @@ namespace pinwell::test {
 namespace {
 
 using testing::HasSubstr;
+using testing::StartsWith;
 
 const std::string kSample = VECTORS_DIRECTORY "/artefacts/Sample.app";
 
@@ -275,6 +276,23 @@ TEST_F(CInterface, TrustsNothingWithoutRoots) {
     EXPECT_EQ(pinwell_roots_count(none.get()), 0U);
     const CResult found = judged(kSample, none);
     EXPECT_EQ(pinwell_result_verdict(found.get()), PINWELL_VERDICT_REFUSED);
+}
+
+TEST_F(CInterface, SaysWhyATicketIsRefused) {
+    const VectorArtefacts artefacts;
+    const auto reason = [&](std::string_view name) {
+        const CResult found = judged(artefacts.named(name), roots);
+        EXPECT_EQ(pinwell_result_verdict(found.get()), PINWELL_VERDICT_REFUSED);
+        EXPECT_EQ(textOf(pinwell_result_reason, verified(artefacts.named(name), roots)),
+                  textOf(pinwell_result_reason, found));
+        return textOf(pinwell_result_reason, found);
+    };
+    EXPECT_EQ(reason("an application whose ticket differs in its last byte"),
+              "Its ticket is not acceptable: the signature does not verify.");
+    EXPECT_EQ(reason("an application with a stale ticket, which lists other software"),
+              "Its ticket is not acceptable: it does not list this artefact.");
+    EXPECT_THAT(reason("an application with a ticket of another authority"),
+                StartsWith("Its ticket is not acceptable: "));
 }
 
 TEST_F(CInterface, NamesRootsThatItLeavesOut) {
