@@ -4,12 +4,14 @@
 #include <utility>
 
 #include "codesign/code_error.h"
+#include "foundation/byte_reader.h"
 #include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "foundation/property_list.h"
 #include "verify/bundle_layout.h"
 #include "verify/bundle_walk.h"
 #include "verify/check_names.h"
+#include "verify/image_layout.h"
 #include "verify/page_hashes.h"
 
 namespace pinwell::verify {
@@ -51,6 +53,7 @@ VerifiedCode verifySeparately(const codesign::ByteSource& executable, const Bund
         componentAt(layout.root, directory + "CodeSignature").value_or(Data()));
     section.pass(kSignature, place, "a well-formed signature");
     checkSigner(*parts, place, section);
+    checkAgreement(*parts, place, section);
     checkSpecialSlots(*parts, outside, place, section);
     checkCodeLimit(*parts, executable.size(), "the end of the file", place, section);
     checkPageHashes(executable, {0, executable.size()}, *parts, place, workers, section);
@@ -68,6 +71,17 @@ bool hasSignatureFiles(const std::string& path) {
 
 }  // namespace
 
+void checkExecuteBit(const OpenFile& file, const std::string& place, Section& section) {
+    if (file.hasExecuteBit()) return;
+    try {
+        if (codesign::isExecutableImage(file) && !isProgram(file)) return;
+    } catch (const CodeError&) {
+        // The image is damaged, which its own checks say.
+    } catch (const foundation::ShortRead&) {
+    }
+    section.fail(kBundleStructure, place, "a program that may be executed", "a file without an execute bit");
+}
+
 VerifiedCode verifyBundleAt(const std::string& path, const std::string& place, WalkState& state,
                             Section& section) {
     const BundleLayout layout = layoutOfBundle(path);
@@ -81,6 +95,7 @@ VerifiedCode verifyBundleAt(const std::string& path, const std::string& place, W
                                     {kSlotResourceSeal, {.bytes = addressOf(document)}}};
     const auto executable = layout.root->fileAt(layout.executable);
     const bool isImage = codesign::isExecutableImage(*executable);
+    checkExecuteBit(*executable, executablePlace, section);
     VerifiedCode code =
         isImage ? verifyExecutable(*executable, outside, executablePlace, state.workers, section)
                 : verifySeparately(*executable, layout, outside, executablePlace, state.workers, section);

@@ -71,6 +71,8 @@ BundleWalk::BundleWalk(const BundleLayout& layout, std::string rootPlace, std::s
       code_(code),
       files_(state.workers, section),
       unsealed_(section, kUnsealed),
+      omitted_(section, kUnsealed),
+      emptyDirectories_(section, kUnsealed),
       links_(section, kSealedLink) {}
 
 std::string BundleWalk::placeOf(const std::string& relative) const {
@@ -130,14 +132,19 @@ void BundleWalk::checkFrameworkAround() {
 
 void BundleWalk::walk(const DirectoryRef& directory, const std::string& relative) {
     const Descent descent(state_);
-    for (const Entry& entry : entriesOf(directory)) visit(directory, entry, joined(relative, entry.name));
+    const std::vector<Entry> entries = entriesOf(directory);
+    // The seal knows no directories, so that an empty one was either signed with the rest or added.
+    if (entries.empty())
+        emptyDirectories_.add(Outcome::noted, placeOf(relative), "a directory that holds something",
+                              "an empty directory, which no seal can list");
+    for (const Entry& entry : entries) visit(directory, entry, joined(relative, entry.name));
 }
 
 void BundleWalk::visit(const DirectoryRef& directory, const Entry& entry, const std::string& relative) {
     if (visitSpecial(directory, entry, relative)) return;
     if (const SealedEntry* const sealed = seal_.find(relative)) return visitSealed(directory, entry, *sealed);
     if (entry.kind == EntryKind::directory) return walk(directory->directory(entry.name), relative);
-    visitUnsealed(relative);
+    visitUnsealed(directory, entry, relative);
 }
 
 // What something other than the seal covers.
@@ -202,11 +209,37 @@ void BundleWalk::visitSealed(const DirectoryRef& directory, const Entry& entry, 
     if (entry.kind == EntryKind::directory) walk(directory->directory(entry.name), sealed.path);
 }
 
-void BundleWalk::visitUnsealed(const std::string& relative) {
+void BundleWalk::visitUnsealed(const DirectoryRef& directory, const Entry& entry,
+                               const std::string& relative) {
     const std::optional<RuleEffect> rule = seal_.ruleFor(relative);
-    if (rule && rule->omits) return;
-    unsealed_.add(Outcome::failed, placeOf(relative), "a file that the seal lists, or none",
-                  rule ? "a file that is not sealed" : "a file that is not sealed, and that no rule names");
+    if (!rule || !rule->omits) {
+        unsealed_.add(
+            Outcome::failed, placeOf(relative), "a file that the seal lists, or none",
+            rule ? "a file that is not sealed" : "a file that is not sealed, and that no rule names");
+    } else if (const char* const fault = faultOfOmitted(directory, entry, relative); fault != nullptr) {
+        unsealed_.add(Outcome::failed, placeOf(relative), "a plain file where a rule lets it out", fault);
+    } else {
+        omitted_.add(Outcome::noted, placeOf(relative), "a file that the seal lists, or none",
+                     "a file that a rule lets out");
+    }
+}
+
+/// What no rule can have been meant for; null if there is nothing of the sort.
+const char* BundleWalk::faultOfOmitted(const DirectoryRef& directory, const Entry& entry,
+                                       const std::string& relative) const {
+    switch (entry.kind) {
+        case EntryKind::file:
+            return codesign::isExecutableImage(*directory->file(entry.name)) ? "code that nothing covers"
+                                                                             : nullptr;
+        case EntryKind::link:
+            return leadsInside(layout_.bundle, joined(layout_.rootPath, relative))
+                       ? nullptr
+                       : "a link that leads out of the bundle";
+        case EntryKind::directory:
+        case EntryKind::other:
+            break;
+    }
+    return "something special";
 }
 
 void BundleWalk::visitLink(const DirectoryRef& directory, const Entry& entry, const SealedEntry& sealed) {
@@ -231,6 +264,7 @@ void BundleWalk::visitNested(const DirectoryRef& directory, const Entry& entry, 
             code = verifyBundleAt(joined(joined(bundlePath_, layout_.rootPath), sealed.path), place, state_,
                                   nested);
         } else if (const auto file = directory->file(entry.name); codesign::isExecutableImage(*file)) {
+            checkExecuteBit(*file, place, nested);
             code = verifyExecutable(*file, {}, place, state_.workers, nested);
         }
     } catch (const CodeError& error) {

@@ -21,6 +21,9 @@ struct WalkState {
 VerifiedCode verifyBundleAt(const std::string& path, const std::string& place, WalkState& state,
                             Section& section);
 
+/// Asks of a program that somebody may execute it: one that has lost that does not start.
+void checkExecuteBit(const OpenFile& file, const std::string& place, Section& section);
+
 class BundleWalk {
   public:
     /// `rootPlace`: where the root of the seal is in the artefact. `bundlePath`: where the bundle is on disk.
@@ -39,7 +42,9 @@ class BundleWalk {
     bool visitSpecial(const DirectoryRef& directory, const Entry& entry, const std::string& relative);
     void visitSignatureDirectory(const DirectoryRef& directory);
     void visitSealed(const DirectoryRef& directory, const Entry& entry, const SealedEntry& sealed);
-    void visitUnsealed(const std::string& relative);
+    void visitUnsealed(const DirectoryRef& directory, const Entry& entry, const std::string& relative);
+    const char* faultOfOmitted(const DirectoryRef& directory, const Entry& entry,
+                               const std::string& relative) const;
     void visitLink(const DirectoryRef& directory, const Entry& entry, const SealedEntry& sealed);
     void visitNested(const DirectoryRef& directory, const Entry& entry, const SealedEntry& sealed);
     void bindNested(VerifiedCode nested, const SealedEntry& sealed, Section& section);
@@ -59,6 +64,8 @@ class BundleWalk {
 
     SealedFiles files_;
     FailureList unsealed_;
+    FailureList omitted_;
+    FailureList emptyDirectories_;
     FailureList links_;
     std::size_t goodLinks_ = 0;
 };

@@ -71,6 +71,7 @@ OpenFile::OpenFile(FileDescriptor file) : file_(std::move(file)) {
     if (fstat(file_.get(), &status) != 0) fail(errno, "the file");
     if (!S_ISREG(status.st_mode)) throw CodeError(codesign::kStaticCodeNotFound, "not a regular file");
     size_ = static_cast<std::uint64_t>(status.st_size);
+    hasExecuteBit_ = (status.st_mode & (S_IXUSR | S_IXGRP | S_IXOTH)) != 0;
 }
 
 void OpenFile::expectSequentialReads() const {

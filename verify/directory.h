@@ -30,6 +30,10 @@ class OpenFile final : public codesign::ByteSource {
     explicit OpenFile(foundation::FileDescriptor file);
 
     std::uint64_t size() const override { return size_; }
+
+    /// Whether anybody may execute it.
+    bool hasExecuteBit() const noexcept { return hasExecuteBit_; }
+
     void expectSequentialReads() const override;
 
   private:
@@ -37,6 +41,7 @@ class OpenFile final : public codesign::ByteSource {
 
     foundation::FileDescriptor file_;
     std::uint64_t size_ = 0;
+    bool hasExecuteBit_ = false;
 };
 
 /// Immutable; may be used from any number of threads. Every method throws codesign::CodeError: kIOError if

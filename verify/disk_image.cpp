@@ -21,7 +21,7 @@ using foundation::format;
 
 namespace {
 
-const std::string kPlace = "disk image";
+const std::string kImagePlace = "disk image";
 
 /// Where the signature is: it ends at the trailer, or it is none.
 std::optional<FileRange> signatureArea(const DiskImageTrailer& trailer, Section& section) {
@@ -37,14 +37,15 @@ std::optional<FileRange> signatureArea(const DiskImageTrailer& trailer, Section&
 
 void checkSigned(const ByteSource& source, const DiskImageTrailer& trailer, const FileRange& area,
                  const SignatureParts& parts, Workers& workers, Section& section) {
-    section.pass(kSignature, kPlace, "a well-formed signature");
+    section.pass(kSignature, kImagePlace, "a well-formed signature");
     const Data canonical = trailer.canonicalBytes();
     const FileRange code{0, area.offset};
-    checkSigner(parts, kPlace, section);
-    checkSpecialSlots(parts, {{codesign::kSlotTrailer, {.bytes = &canonical, .mustBeCovered = true}}}, kPlace,
-                      section);
-    checkCodeLimit(parts, code.length, "the signature", kPlace, section);
-    checkPageHashes(source, code, parts, kPlace, workers, section);
+    checkSigner(parts, kImagePlace, section);
+    checkAgreement(parts, kImagePlace, section);
+    checkSpecialSlots(parts, {{codesign::kSlotTrailer, {.bytes = &canonical, .mustBeCovered = true}}},
+                      kImagePlace, section);
+    checkCodeLimit(parts, code.length, "the signature", kImagePlace, section);
+    checkPageHashes(source, code, parts, kImagePlace, workers, section);
 }
 
 /// Whether a file without a trailer was an image: a trailer that is cut, moved, or damaged in its first
@@ -68,14 +69,16 @@ VerifiedCode verified(const ByteSource& source, Workers& workers, Section& secti
         section.fail(kTrailer, "end of the file", "a disk image's trailer", "none that can be read");
         return {.isSigned = wasDiskImage(source), .identities = {}};
     }
+    // An image without a signature has a hash all the same, which is made up of all its data.
     const std::optional<FileRange> area = signatureArea(*trailer, section);
-    if (!area) return {};
     if (worstOutcome(section) == Outcome::failed) return {.isSigned = true, .identities = {}};
-    const std::optional<SignatureParts> parts =
-        SignatureParts::fromSuperBlob(codesign::readSuperBlob(source, area->offset, area->length));
-    if (!parts) return {};  // it carries a ticket and nothing else
+    if (!area) return {.isSigned = true, .identities = {}};
+    const Data superblob = codesign::readSuperBlob(source, area->offset, area->length);
+    checkBlobs(superblob, SignatureHost::diskImage, kImagePlace, section);
+    const std::optional<SignatureParts> parts = SignatureParts::fromSuperBlob(superblob);
+    if (!parts) return {.isSigned = true, .identities = {}};  // it carries a ticket and nothing else
     checkSigned(source, *trailer, *area, *parts, workers, section);
-    return {.isSigned = true, .identities = {identityOf(*parts, kPlace)}};
+    return {.isSigned = true, .identities = {identityOf(*parts, kImagePlace)}};
 }
 
 }  // namespace
@@ -85,12 +88,12 @@ VerifiedCode verifyDiskImage(const ByteSource& source, Workers& workers, Section
         return verified(source, workers, section);
     } catch (const CodeError& error) {
         if (error.status() == codesign::kIOError) {
-            section.cannotRead(kSignature, kPlace, error.what());
+            section.cannotRead(kSignature, kImagePlace, error.what());
         } else {
-            section.fail(kSignature, kPlace, "a well-formed signature", error.what());
+            section.fail(kSignature, kImagePlace, "a well-formed signature", error.what());
         }
     } catch (const foundation::ShortRead& error) {
-        section.fail(kSignature, kPlace, "a well-formed signature", error.what());
+        section.fail(kSignature, kImagePlace, "a well-formed signature", error.what());
     }
     return {.isSigned = true, .identities = {}};
 }

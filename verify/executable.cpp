@@ -12,6 +12,7 @@
 #include "foundation/format.h"
 #include "verify/check_names.h"
 #include "verify/image_layout.h"
+#include "verify/page_digest.h"
 #include "verify/page_hashes.h"
 
 namespace pinwell::verify {
@@ -71,10 +72,12 @@ class ImageCheck {
         const std::optional<FileRange> area = codesign::findImageSignature(source_, slice);
         if (!area) return false;
         try {
-            std::optional<SignatureParts> parts =
-                SignatureParts::fromSuperBlob(codesign::readSuperBlob(source_, area->offset, area->length));
+            const Data superblob = codesign::readSuperBlob(source_, area->offset, area->length);
+            const std::optional<SignatureParts> parts = SignatureParts::fromSuperBlob(superblob);
             if (!parts) return false;
             section_.pass(kSignature, at, "a well-formed signature");
+            checkBlobs(superblob, SignatureHost::executable, at, section_);
+            notePadding({area->offset + superblob.size(), area->length - superblob.size()}, at);
             checkContents(slice, *area, *parts, at);
             identity = identityOf(*parts, at);
         } catch (const CodeError& error) {
@@ -83,6 +86,15 @@ class ImageCheck {
             section_.fail(kSignature, at, "a well-formed signature", error.what());
         }
         return true;
+    }
+
+    /// Signers reserve room for a signature and leave in it what was there.
+    void notePadding(const FileRange& padding, const std::string& at) {
+        if (isZero(source_, padding)) return;
+        section_.note(kBehindSignature,
+                      format("%@, after the superblob (bytes %llu to %llu)", at, padding.offset,
+                             padding.offset + padding.length - 1),
+                      "padding of zeros", format("%llu bytes that nothing covers", padding.length));
     }
 
     void reportBroken(const std::string& at, const CodeError& error) {
@@ -105,6 +117,7 @@ class ImageCheck {
         }
         const FileRange code{slice.range.offset, area.offset - slice.range.offset};
         checkSigner(parts, at, section_);
+        checkAgreement(parts, at, section_);
         checkSpecialSlots(parts, outside, at, section_);
         checkCodeLimit(parts, code.length, "the signature", at, section_);
         checkBehindSignature(source_, slice, layout, area, at, section_);

@@ -144,19 +144,6 @@ std::string sliceName(std::uint32_t cpuType) {
     }
 }
 
-bool isZero(const ByteSource& source, const FileRange& range) {
-    for (std::uint64_t done = 0; done < range.length;) {
-        const auto length =
-            static_cast<std::size_t>(std::min<std::uint64_t>(kBufferSize, range.length - done));
-        const std::span<std::byte> buffer = threadBuffer().first(length);
-        source.read(range.offset + done, buffer);
-        if (std::any_of(buffer.begin(), buffer.end(), [](std::byte byte) { return byte != std::byte{0}; }))
-            return false;
-        done += length;
-    }
-    return true;
-}
-
 ImageLayout readImageLayout(const ByteSource& source, const ImageSlice& slice) {
     constexpr std::size_t kHeader32 = 28;
     constexpr std::size_t kHeader64 = 32;
@@ -174,7 +161,7 @@ ImageLayout readImageLayout(const ByteSource& source, const ImageSlice& slice) {
     ImageLayout layout;
     layout.cpuType = header.u32("CPU type");
     layout.cpuSubtype = header.u32("CPU subtype");
-    header.skip(4, "file type");
+    layout.fileType = header.u32("file type");
     const std::uint32_t count = header.u32("count of load commands");
     const std::uint32_t size = header.u32("size of load commands");
     const std::size_t headerSize = is64 ? kHeader64 : kHeader32;
@@ -192,6 +179,12 @@ ImageLayout readImageLayout(const ByteSource& source, const ImageSlice& slice) {
         if (command == (is64 ? kCommandSegment64 : kCommandSegment32)) readSegment(body, layout);
     }
     return layout;
+}
+
+bool isProgram(const ByteSource& source) {
+    constexpr std::uint32_t kExecutable = 2;
+    const std::vector<ImageSlice> slices = codesign::readSlices(source);
+    return readImageLayout(source, codesign::preferredSlice(slices)).fileType == kExecutable;
 }
 
 void checkUniversalHeader(const ByteSource& source, const std::vector<ImageSlice>& slices,

@@ -26,6 +26,7 @@ struct Segment {
 struct ImageLayout {
     std::uint32_t cpuType = 0;
     std::uint32_t cpuSubtype = 0;
+    std::uint32_t fileType = 0;
     std::vector<Segment> segments;
     std::optional<FileRange> propertyList;  // section __info_plist of segment __TEXT
 };
@@ -44,8 +45,9 @@ void checkBehindSignature(const ByteSource& source, const codesign::ImageSlice& 
                           const ImageLayout& layout, const FileRange& signature, const std::string& place,
                           Section& section);
 
-/// Whether a range of the source is all zero. Throws codesign::CodeError.
-bool isZero(const ByteSource& source, const FileRange& range);
+/// Whether an executable image is one that a system can start, and not a library of code. Throws as
+/// readImageLayout() does.
+bool isProgram(const ByteSource& source);
 
 /// "64-bit ARM slice", "64-bit x86 slice", "slice of CPU type 0x...".
 std::string sliceName(std::uint32_t cpuType);

@@ -2,16 +2,19 @@
 
 #include <algorithm>
 #include <mutex>
+#include <optional>
+#include <set>
+#include <string_view>
 #include <utility>
 
-#include "codesign/cms_signature.h"
 #include "codesign/code_error.h"
 #include "foundation/byte_reader.h"
 #include "foundation/bytes.h"
 #include "foundation/format.h"
-#include "src/PWHashedFile/package_trailer_walk.h"
 #include "verify/archive_table.h"
 #include "verify/check_names.h"
+#include "verify/package_trailers.h"
+#include "verify/signature_parts.h"
 #include "xar/header.h"
 #include "xar/inflater.h"
 #include "xar/table_of_contents.h"
@@ -32,51 +35,6 @@ constexpr std::string_view kCmsStyle = "CMS";
 /// Longest signature that is held whole; one takes some 10 KiB.
 constexpr std::uint64_t kMaximumSignature = std::uint64_t{16} * 1024 * 1024;
 
-/// The first bytes of a source, as the walk along the trailers reads them.
-class StartOfSource final : public files::FileReader {
-  public:
-    StartOfSource(const ByteSource& source, std::uint64_t end) : source_(source), end_(end) {}
-
-    std::uint64_t seekToEnd() override { return position_ = end_; }
-    std::uint64_t seek(std::uint64_t position) override { return position_ = position; }
-    std::uint64_t position() override { return position_; }
-    Data read(std::uint64_t length) override {
-        const std::uint64_t rest = end_ - std::min(position_, end_);
-        const auto count = static_cast<std::size_t>(std::min(length, rest));
-        try {
-            Data bytes = source_.read(position_, count);
-            position_ += count;
-            return bytes;
-        } catch (const CodeError& error) {
-            throw files::FileHandleError(error.what());
-        }
-    }
-
-  private:
-    const ByteSource& source_;
-    const std::uint64_t end_;
-    std::uint64_t position_ = 0;
-};
-
-/// Where the archive ends and the trailers behind it begin.
-std::uint64_t endOfArchive(const ByteSource& source, Section& section) {
-    std::uint64_t end = source.size();
-    for (;;) {
-        std::uint64_t first = end;
-        StartOfSource reader(source, end);
-        const package_trailers walked =
-            walkPackageTrailers(reader, {}, [&](std::uint64_t recordOffset, const trailer_header& record) {
-                first = recordOffset - std::min<std::uint64_t>(record.length(), recordOffset);
-                if (record.type() != kTerminatorTrailerType && record.type() != kTicketTrailerType)
-                    section.note(kTrailers, format("trailer (from byte %llu on)", first), "a ticket",
-                                 format("a trailer of type %u", record.type()));
-            });
-        if (walked.fault || first == end) return end;
-        end = first;
-        if (walked.hasTerminator) return end;
-    }
-}
-
 struct Archive {
     std::uint64_t heapStart = 0;
     ArchiveTable table;
@@ -85,11 +43,28 @@ struct Archive {
     Data stored;    // the one in the heap, which is signed
 };
 
+/// The fields that the archive reader passes over: no checksum covers the header.
+void requireHeaderForm(ByteView start, const xar::Header& header) {
+    constexpr std::size_t kVersionOffset = 6;
+    constexpr std::uint16_t kVersion = 1;
+    foundation::ByteReader reader(start);
+    reader.seek(kVersionOffset, "version");
+    if (const std::uint16_t version = reader.be16("version"); version != kVersion)
+        refuse(format("the archive's header has the version %u", version));
+    if (header.size > xar::kLongestHeaderRead) refuse("the archive's header is too long");
+    const ByteView name =
+        start.first(std::min<std::size_t>(header.size, start.size())).subspan(xar::kFixedHeaderSize);
+    const auto end = std::find(name.begin(), name.end(), std::byte{0});
+    if (std::any_of(end, name.end(), [](std::byte byte) { return byte != std::byte{0}; }))
+        refuse("the archive's header has bytes after the checksum algorithm's name");
+}
+
 Archive readArchive(const ByteSource& source, std::uint64_t end) {
     const auto start =
         source.read(0, static_cast<std::size_t>(std::min<std::uint64_t>(xar::kLongestHeaderRead, end)));
     const std::optional<xar::Header> header = xar::parseHeader(start);
     if (!header) refuse("the archive's header is damaged");
+    requireHeaderForm(start, *header);
     if (header->size > end || header->compressedLength > end - header->size ||
         header->compressedLength > xar::kMaximumTableOfContents)
         refuse("the table of contents lies outside the archive");
@@ -151,8 +126,7 @@ class PackageCheck {
         section_.pass(kArchive, "archive",
                       format("a table of contents with %zu files", archive_.table.files.size()));
         VerifiedCode code;
-        code.isSigned = std::any_of(archive_.table.signatures.begin(), archive_.table.signatures.end(),
-                                    [](const ArchiveSignature& one) { return one.style == kCmsStyle; });
+        code.isSigned = !archive_.table.signatures.empty();
         checkTable();
         checkSignatures(code);
         checkFiles();
@@ -186,7 +160,8 @@ class PackageCheck {
         for (const ArchiveSignature& signature : archive_.table.signatures) {
             const std::string place = format("signature %zu (%@)", ++number, signature.style);
             if (signature.style != kCmsStyle) {
-                section_.skip(kArchiveSignature, place, "signatures of this style are not looked at");
+                section_.note(kArchiveSignature, place, "a signature of the style CMS",
+                              "one of another style, whose bytes nothing covers");
                 continue;
             }
             const auto range = signature.range ? inFile(archive_, *signature.range, end_) : std::nullopt;
@@ -198,21 +173,22 @@ class PackageCheck {
             const ByteView message = withoutPadding(bytes);
             try {
                 if (archive_.stored.empty()) refuse("there is no checksum that it could be over");
-                codesign::requireDetachedCms(message, archive_.stored);
+                const SignerMessage signer = requireSignerMessage(message, archive_.stored);
                 section_.pass(kArchiveSignature, place, kWanted);
-                addIdentity(message, code);
+                noteCertificates(signer, place, section_);
+                addIdentity(signer, code);
             } catch (const CodeError& error) {
                 section_.fail(kArchiveSignature, place, kWanted, error.what());
             }
         }
     }
 
-    void addIdentity(ByteView message, VerifiedCode& code) const {
+    void addIdentity(const SignerMessage& signer, VerifiedCode& code) const {
         if (!code.identities.empty()) return;
         CodeIdentity identity;
         identity.place = "package";
         identity.codeHashes = {archive_.stored};
-        identity.hasSecureTimestamp = codesign::secureTimestamp(message).has_value();
+        identity.hasSecureTimestamp = signer.hasTimestamp;
         code.identities.push_back(std::move(identity));
     }
 
@@ -267,11 +243,30 @@ class PackageCheck {
         std::sort(faults.begin(), faults.end(),
                   [](const Fault& a, const Fault& b) { return a.data < b.data; });
         FailureList failures(section_, kArchivedFile);
+        checkNames(failures);
         for (Fault& fault : faults)
             failures.add(fault.outcome, placeOf(*fault.data), foundation::toHex(fault.data->checksum),
                          std::move(fault.found));
         if (failures.count() == 0)
             section_.pass(kArchivedFile, "heap", format("%zu entries with their checksums", all.size()));
+    }
+
+    /// Whoever unpacks the archive makes paths of the names.
+    void checkNames(FailureList& failures) const {
+        using Child = std::pair<std::optional<std::size_t>, std::string_view>;
+        std::set<Child> seen;
+        for (std::size_t i = 0; i < archive_.table.files.size(); ++i) {
+            const ArchiveTable::File& file = archive_.table.files[i];
+            const bool isName = !file.name.empty() && file.name != "." && file.name != ".." &&
+                                file.name.find('/') == std::string::npos;
+            if (!isName) {
+                failures.add(Outcome::failed, archive_.table.pathOf(i), "the name of a file",
+                             "a path, or none");
+            } else if (!seen.emplace(file.parent, file.name).second) {
+                failures.add(Outcome::failed, archive_.table.pathOf(i), "one entry of that name",
+                             "another one");
+            }
+        }
     }
 
     /// Empty if the bytes are as the table says.
@@ -334,10 +329,13 @@ class PackageCheck {
         if (overlaps.count() == 0) section_.pass(kHeap, "heap", "entries that do not overlap");
     }
 
+    // The table of contents, which is signed, says where a gap is, and nothing says what is in it.
     void reportGap(std::uint64_t begin, std::uint64_t end, FailureList& gaps) const {
         if (begin >= end) return;
+        const bool isInside = end < end_ - archive_.heapStart;
+        const bool isHarmless = isInside && isZero(source_, {archive_.heapStart + begin, end - begin});
         gaps.add(
-            Outcome::noted,
+            isHarmless ? Outcome::noted : Outcome::failed,
             format("heap (bytes %llu to %llu)", archive_.heapStart + begin, archive_.heapStart + end - 1),
             "bytes that an entry claims", format("%llu bytes that nothing claims", end - begin));
     }

@@ -132,4 +132,17 @@ ByteView digestOf(Algorithm algorithm, const codesign::ByteSource& source, const
     return digest.finish();
 }
 
+bool isZero(const codesign::ByteSource& source, const codesign::FileRange& range) {
+    for (std::uint64_t done = 0; done < range.length;) {
+        const auto length =
+            static_cast<std::size_t>(std::min<std::uint64_t>(kBufferSize, range.length - done));
+        const std::span<std::byte> buffer = threadBuffer().first(length);
+        source.read(range.offset + done, buffer);
+        if (std::any_of(buffer.begin(), buffer.end(), [](std::byte byte) { return byte != std::byte{0}; }))
+            return false;
+        done += length;
+    }
+    return true;
+}
+
 }  // namespace pinwell::verify

@@ -55,4 +55,7 @@ std::span<std::byte> threadBuffer();
 /// codesign::CodeError.
 ByteView digestOf(Algorithm algorithm, const codesign::ByteSource& source, const codesign::FileRange& range);
 
+/// Whether a range of a source is all zero. Uses the thread's buffer. Throws codesign::CodeError.
+bool isZero(const codesign::ByteSource& source, const codesign::FileRange& range);
+
 }  // namespace pinwell::verify

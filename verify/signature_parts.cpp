@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <utility>
 
-#include "codesign/cms_signature.h"
 #include "codesign/code_error.h"
 #include "codesign/disk_image_trailer.h"
 #include "codesign/superblob.h"
@@ -201,6 +200,13 @@ void checkSpecialSlots(const SignatureParts& parts, const OutsideComponents& out
     }
 }
 
+void noteCertificates(const SignerMessage& message, const std::string& place, Section& section) {
+    if (message.certificatesWithoutIssuer == 0) return;
+    section.note(kSigner, place, "certificates with their issuers",
+                 format("%zu certificates whose issuer the signer's message does not have",
+                        message.certificatesWithoutIssuer));
+}
+
 void checkSigner(const SignatureParts& parts, const std::string& place, Section& section) {
     constexpr const char* kWanted = "a signer's message over the code directory, or none for ad hoc";
     if (parts.cms().empty()) {
@@ -212,8 +218,10 @@ void checkSigner(const SignatureParts& parts, const std::string& place, Section&
         return;
     }
     try {
-        codesign::requireDetachedCms(parts.cms(), parts.directories().front().content.bytes());
+        const SignerMessage message =
+            requireSignerMessage(parts.cms(), parts.directories().front().content.bytes());
         section.pass(kSigner, place, "a signature that verifies");
+        noteCertificates(message, place, section);
     } catch (const codesign::CodeError& error) {
         section.fail(kSigner, place, kWanted, error.what());
     }

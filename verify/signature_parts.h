@@ -14,6 +14,7 @@
 #include "codesign/code_directory.h"
 #include "foundation/bytes.h"
 #include "verify/check.h"
+#include "verify/signer_message.h"
 
 namespace pinwell::verify {
 
@@ -74,6 +75,17 @@ class SignatureParts {
     ByteView cms_;
 };
 
+/// What a superblob is in. Only a disk image has its ticket there.
+enum class SignatureHost { executable, diskImage };
+
+/// Asks that every blob of a well-formed superblob be one that something covers, that it have the magic of
+/// its slot, and that nothing but zeros be between the blobs. The ticket's blob covers itself.
+void checkBlobs(ByteView superblob, SignatureHost host, const std::string& place, Section& section);
+
+/// Asks that all code directories say the same, each in its own digest type. A reader goes by the one that it
+/// prefers, and a ticket need not list them all.
+void checkAgreement(const SignatureParts& parts, const std::string& place, Section& section);
+
 /// Something that a special slot covers and that does not travel with the signature.
 struct OutsideComponent {
     const Data* bytes = nullptr;  // null: there is nothing of that kind
@@ -92,6 +104,9 @@ void checkSpecialSlots(const SignatureParts& parts, const OutsideComponents& out
 
 /// Whether the signer's message verifies, or is rightly absent.
 void checkSigner(const SignatureParts& parts, const std::string& place, Section& section);
+
+/// Adds a note if the message has certificates whose own signatures cannot be verified.
+void noteCertificates(const SignerMessage& message, const std::string& place, Section& section);
 
 /// "special slot 3 (sealed resources)".
 std::string specialSlotName(std::uint32_t slot);

@@ -23,11 +23,12 @@ constexpr const char* kMessage = "the signer's message";
 constexpr const char* kSigner = "the signer in the message";
 constexpr const char* kCertificate = "a certificate in the message";
 
-void requireVersion(Reader& reader, std::initializer_list<int> known, const char* what) {
+int readVersion(Reader& reader, std::initializer_list<int> known, const char* what) {
     const ByteView version = reader.expect(ber::kInteger, what).contents;
-    const bool isKnown =
-        version.size() == 1 && std::ranges::find(known, std::to_integer<int>(version.front())) != known.end();
-    if (!isKnown) refuse(std::string(what) + " has an unknown version");
+    const int number = version.size() == 1 ? std::to_integer<int>(version.front()) : -1;
+    if (std::ranges::find(known, number) == known.end())
+        refuse(std::string(what) + " has an unknown version");
+    return number;
 }
 
 Reader within(Reader& reader, std::uint8_t tag, Work& work, const char* what) {
@@ -66,6 +67,7 @@ MessageCertificate parseCertificate(const Element& element, Work& work) {
     certificate.finish(kCertificate);
 
     MessageCertificate found;
+    found.whole = element.whole;
     fields.nextIf(ber::context(0), kCertificate);
     found.serialNumber = readInteger(fields, kCertificate);
     fields.expect(ber::kSequence, kCertificate);
@@ -92,24 +94,24 @@ std::vector<Algorithm> parseDigestAlgorithms(Reader list, Work& work) {
 }
 
 // Other forms than X.509, all of them tagged, count and are not looked at: no signer here can have one.
-std::vector<MessageCertificate> parseCertificates(const Element& element, Work& work) {
-    std::vector<MessageCertificate> certificates;
-    std::size_t count = 0;
+void parseCertificates(const Element& element, Work& work, SignedMessage& into) {
     for (Reader list(element.contents, work); !list.atEnd();) {
-        if (++count > kMaximumCertificates) refuse("the signer's message has too many certificates");
+        if (into.certificates.size() + into.otherCertificates == kMaximumCertificates)
+            refuse("the signer's message has too many certificates");
         const Element certificate = list.next(kCertificate);
         if (certificate.tag == ber::kSequence) {
-            certificates.push_back(parseCertificate(certificate, work));
+            into.certificates.push_back(parseCertificate(certificate, work));
         } else if (certificate.tag < ber::context(0) || certificate.tag > ber::context(3)) {
             refuse("a certificate in the message is malformed");
+        } else {
+            ++into.otherCertificates;
         }
     }
-    return certificates;
 }
 
 MessageSigner parseSigner(Reader fields, Work& work) {
     MessageSigner signer;
-    requireVersion(fields, {1, 3}, kSigner);
+    signer.version = readVersion(fields, {1, 3}, kSigner);
     if (const auto byName = fields.nextIf(ber::kSequence, kSigner)) {
         Reader name(byName->contents, work);
         signer.issuer = name.expect(ber::kSequence, kSigner).whole;
@@ -170,12 +172,12 @@ SignedMessage parseSignedMessage(ByteView bytes) {
     wrapper.finish(kMessage);
 
     SignedMessage message;
-    requireVersion(fields, {1, 3, 4, 5}, kMessage);
+    message.version = readVersion(fields, {1, 3, 4, 5}, kMessage);
     message.digestAlgorithms = parseDigestAlgorithms(within(fields, ber::kSet, work, kMessage), work);
     parseContent(within(fields, ber::kSequence, work, kMessage), work, message);
     if (const auto certificates = fields.nextIf(ber::context(0), kMessage))
-        message.certificates = parseCertificates(*certificates, work);
-    fields.nextIf(ber::context(1), kMessage);
+        parseCertificates(*certificates, work, message);
+    message.hasRevocationLists = fields.nextIf(ber::context(1), kMessage).has_value();
     Reader signers = within(fields, ber::kSet, work, kMessage);
     fields.finish(kMessage);
     if (signers.atEnd()) refuse("the signer's message has no signer");
@@ -202,6 +204,15 @@ std::optional<Element> soleValueOf(const Element& attributes, ByteView type, con
         fields.finish(what);
     }
     return matches == 1 && values == 1 ? found : std::nullopt;
+}
+
+bool hasAttributeBeside(const Element& attributes, ByteView type, const char* what) {
+    Work work;
+    for (Reader list(attributes.contents, work); !list.atEnd();) {
+        Reader fields = within(list, ber::kSequence, work, what);
+        if (!ber::isEqual(fields.expect(ber::kObjectIdentifier, what).contents, type)) return true;
+    }
+    return false;
 }
 
 }  // namespace pinwell::codesign

@@ -34,6 +34,7 @@ struct Algorithm {
 
 /// What the choice of a signer's certificate and its key need of an X.509 certificate. Nothing is verified.
 struct MessageCertificate {
+    foundation::ByteView whole;
     foundation::ByteView issuer;                    // the whole Name
     foundation::ByteView serialNumber;              // contents of the INTEGER
     foundation::ByteView publicKey;                 // the whole SubjectPublicKeyInfo
@@ -41,6 +42,7 @@ struct MessageCertificate {
 };
 
 struct MessageSigner {
+    int version = 1;
     foundation::ByteView issuer;                    // and serial number; empty if there is a key identifier
     foundation::ByteView serialNumber;              // contents of the INTEGER
     std::optional<foundation::Data> keyIdentifier;  // in the place of both
@@ -53,10 +55,13 @@ struct MessageSigner {
 
 /// A message. Its views are into the bytes that it was parsed from.
 struct SignedMessage {
+    int version = 1;
     std::vector<Algorithm> digestAlgorithms;
     foundation::ByteView contentType;         // contents of the OBJECT IDENTIFIER
     std::optional<foundation::Data> content;  // nullopt: detached
     std::vector<MessageCertificate> certificates;
+    std::size_t otherCertificates = 0;  // of other forms than X.509
+    bool hasRevocationLists = false;
     MessageSigner signer;
 };
 
@@ -70,5 +75,9 @@ std::optional<ber::Element> soleValueOf(const ber::Element& attributes, foundati
 
 /// An AlgorithmIdentifier, the next element of `reader`. Throws CodeError.
 Algorithm readAlgorithm(ber::Reader& reader, ber::Work& work, const char* what);
+
+/// Whether `attributes` holds an attribute of another type than this one. Throws CodeError if any is
+/// malformed.
+bool hasAttributeBeside(const ber::Element& attributes, foundation::ByteView type, const char* what);
 
 }  // namespace pinwell::codesign

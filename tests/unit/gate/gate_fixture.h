@@ -1,0 +1,47 @@
+// Artefacts as a consumer gets them: samples of the record service, stapled by the tool's own functions with
+// tickets of a root that the platform trusts. What is real here is everything but the network.
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+#include "gate/run.h"
+#include "src/host_platform.h"
+#include "support/environment.h"
+#include "support/temporary_directory.h"
+#include "support/ticket_builder.h"
+
+namespace pinwell::test {
+
+using foundation::ByteView;
+using foundation::Data;
+using gate::Result;
+
+class GateTest : public testing::Test {
+  protected:
+    GateTest();
+
+    /// The result of a run over one path, without the network.
+    Result judge(const std::string& path) const;
+    int exitStatusFor(const std::string& path) const { return gate::exitStatusOf(judge(path).verdict); }
+
+    /// Staples a ticket that lists all code of the artefact. Fails the test if it cannot.
+    void staple(const std::string& path) const;
+
+    /// Writes the bytes to a file of that name and staples it. Returns its path.
+    std::string stapled(const std::string& name, ByteView bytes) const;
+
+    const TemporaryDirectory directory;
+    const IssuedChain chain = TicketChain().issue();
+
+  private:
+    const ScopedVariable environment_{"PINWELL_PLATFORM", directory / "platform"};
+    const HostPlatform host_{[](int) {}};
+};
+
+/// The checks of a result that failed, a line each: "NAME: PLACE".
+std::vector<std::string> failuresOf(const Result& result);
+
+}  // namespace pinwell::test
