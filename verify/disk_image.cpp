@@ -8,6 +8,7 @@
 #include "foundation/byte_reader.h"
 #include "foundation/bytes.h"
 #include "foundation/format.h"
+#include "verify/block_table.h"
 #include "verify/check_names.h"
 #include "verify/page_hashes.h"
 
@@ -72,6 +73,7 @@ VerifiedCode verified(const ByteSource& source, Workers& workers, Section& secti
     // An image without a signature has a hash all the same, which is made up of all its data.
     const std::optional<FileRange> area = signatureArea(*trailer, section);
     if (worstOutcome(section) == Outcome::failed) return {.isSigned = true, .identities = {}};
+    checkBlockTables(source, *trailer, workers, section);
     if (!area) return {.isSigned = true, .identities = {}};
     const Data superblob = codesign::readSuperBlob(source, area->offset, area->length);
     checkBlobs(superblob, SignatureHost::diskImage, kImagePlace, section);

@@ -1,0 +1,48 @@
+// The checksums that a disk image has of itself: a second opinion on its data, beside the hashes of its
+// signature. All integers are big-endian; a sector is 512 bytes.
+//
+// The trailer (src/PWHashedFile/udif_header.h) says where the data fork is, with a checksum of its bytes, and
+// where a property list is whose resource-fork/blkx holds the tables:
+//
+// | Offset | Size | Field of a table                                                                |
+// |--------|------|---------------------------------------------------------------------------------|
+// | 0      | 4    | "mish"                                                                          |
+// | 4      | 12   | version (4), first sector (8)                                                   |
+// | 16     | 8    | count of sectors                                                                |
+// | 24     | 40   | offset that blocks count from in the data fork (8), and more                    |
+// | 64     | 136  | checksum of the unpacked sectors: type (4), bits (4), value (128)               |
+// | 200    | 4    | count of blocks                                                                 |
+// | 204    | 40 x | blocks: type (4), comment (4), first sector, count of sectors, offset, length   |
+//
+// | Type       | Block                                                                                     |
+// |------------|-------------------------------------------------------------------------------------------|
+// | 0, 2       | zeros                                                                                     |
+// | 1          | as they are                                                                               |
+// | 80000005   | a zlib stream                                                                             |
+// | 7FFFFFFE   | a comment                                                                                 |
+// | FFFFFFFF   | the end                                                                                   |
+// | any other  | packed in a way that is not read: the table is skipped                                    |
+//
+// Checksums of type 2 with 32 bits are CRC-32; others are skipped. The master checksum is that of the tables'
+// values, one after the other. What is skipped is said with its reason: only a checksum that differs, or a
+// table that contradicts itself, is a fault.
+#pragma once
+
+#include "codesign/disk_image_trailer.h"
+#include "verify/check.h"
+#include "verify/workers.h"
+
+namespace pinwell::verify {
+
+/// Beyond it, in bytes that go in or come out, an image has no second opinion: its hashes cover every byte.
+inline constexpr std::uint64_t kMaximumUnpacked = std::uint64_t{256} * 1024 * 1024;
+
+/// Blocks of all tables. An image of kMaximumUnpacked has about a thousand.
+inline constexpr std::size_t kMaximumBlocks = 16'384;
+
+/// Adds a check for each checksum. Memory: the property list, and one buffer a thread. Throws
+/// codesign::CodeError if the bytes cannot be read.
+void checkBlockTables(const codesign::ByteSource& source, const codesign::DiskImageTrailer& trailer,
+                      Workers& workers, Section& section);
+
+}  // namespace pinwell::verify
