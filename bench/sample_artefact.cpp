@@ -1,4 +1,9 @@
-// Turns a file of any contents and size into a signed artefact: sample_artefact image|package FILE
+// Artefacts for the benchmarks:
+//
+//   sample_artefact image|package FILE    turns a file of any contents and size into a signed artefact
+//   sample_artefact paged-image FILE      the same, with a hash for every page of an image
+//   sample_artefact bundle DIRECTORY FILES BYTES
+//                                         writes a bundle with that many sealed files of that many bytes
 //
 // A signature and a trailer are put behind the contents of an image, an archive's header and table of
 // contents over the beginning of a package. All else in the file is left as it lies on the disk.
@@ -6,10 +11,17 @@
 #include <exception>
 #include <filesystem>
 #include <fstream>
+#include <random>
 #include <string_view>
 
+#include "foundation/format.h"
+#include "lumora-local/ad_hoc_signature.h"
+#include "lumora-local/property_list_document.h"
+#include "lumora-local/resource_seal.h"
+#include "lumora-local/sample_bundle.h"
 #include "support/archive_builder.h"
 #include "support/disk_image_builder.h"
+#include "support/temporary_directory.h"
 
 namespace {
 
@@ -29,10 +41,45 @@ void writeAt(std::uint64_t offset, const Data& bytes, const char* path) {
     file.close();
 }
 
+/// Holds the image in memory: nothing is measured here.
+void signPages(const char* path) {
+    const Data contents = pinwell::foundation::toData(pinwell::test::readFile(path));
+    constexpr std::uint32_t kTrailerSlot = 6;
+    const Data superblob =
+        pinwell::lumora::AdHocSignature{.identifier = "com.example.benchmark",
+                                        .code = contents,
+                                        .components = {{kTrailerSlot, DiskImageBuilder().trailer()}}}
+            .superblob();
+    writeAt(contents.size(),
+            DiskImageBuilder().data({}).codeSignOffset(contents.size()).superblob(superblob).build(), path);
+}
+
+void writeBundle(const std::string& bundle, int files, std::size_t size) {
+    const std::string contents = bundle + "/Contents/";
+    std::mt19937_64 random(1);  // NOLINT: the same files in every run
+    pinwell::lumora::ResourceSeal seal;
+    for (int i = 0; i < files; ++i) {
+        const std::string path = pinwell::foundation::format("Resources/%d/%d", i % 100, i);
+        Data bytes(size);
+        for (std::byte& byte : bytes) byte = static_cast<std::byte>(random());
+        pinwell::test::writeFile(contents + path, bytes);
+        seal.addFile(path, bytes);
+    }
+    const Data list = pinwell::lumora::propertyListDocument({{"CFBundleExecutable", "Sample"}});
+    const pinwell::lumora::SealedComponents components{list, seal.document()};
+    const std::string executable = contents + "Programs/Sample";
+    pinwell::test::writeFile(contents + "Info.plist", list);
+    pinwell::test::writeFile(contents + "_CodeSignature/CodeResources", components.resourceSeal);
+    pinwell::test::writeFile(
+        executable, pinwell::lumora::makeSignedImage(pinwell::lumora::kCpuTypeArm64, "com.example.benchmark",
+                                                     components));
+    std::filesystem::permissions(executable, std::filesystem::perms::owner_all);
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
-    const std::string_view kind = argc == 3 ? argv[1] : "";
+    const std::string_view kind = argc == 3 || argc == 5 ? argv[1] : "";
     try {
         if (kind == "image") {
             const std::uint64_t size = std::filesystem::file_size(argv[2]);
@@ -41,8 +88,14 @@ int main(int argc, char** argv) {
             writeAt(size, behind.build(), argv[2]);
         } else if (kind == "package") {
             writeAt(0, ArchiveBuilder().signature("CMS").build(), argv[2]);
+        } else if (kind == "paged-image") {
+            signPages(argv[2]);
+        } else if (kind == "bundle" && argc == 5) {
+            writeBundle(argv[2], std::stoi(argv[3]), std::stoul(argv[4]));
         } else {
-            std::fprintf(stderr, "usage: sample_artefact image|package FILE\n");
+            std::fprintf(stderr,
+                         "usage: sample_artefact image|package|paged-image FILE\n"
+                         "       sample_artefact bundle DIRECTORY FILES BYTES\n");
             return kExitUsage;
         }
     } catch (const std::exception& failure) {
