@@ -61,10 +61,9 @@ std::optional<std::string> configurationDirectory() {
 }
 
 Dictionary readDomain(std::string_view domain) {
-    const std::optional<std::string> directory = configurationDirectory();
-    if (!directory || !foundation::isSafeFileName(domain)) return {};
-    const auto document =
-        foundation::readSmallFile(*directory + "/" + std::string(domain) + ".json", kMaximumDomainFile);
+    const std::optional<std::string> path = domainFile(domain);
+    if (!path) return {};
+    const auto document = foundation::readSmallFile(*path, kMaximumDomainFile);
     if (!document) return {};
     const auto values = foundation::parseJSON(*document);
     if (!values || values->dictionary() == nullptr) return {};
@@ -79,6 +78,12 @@ class Service final : public UserDefaultsService {
 };
 
 }  // namespace
+
+std::optional<std::string> domainFile(std::string_view domain) {
+    const std::optional<std::string> directory = configurationDirectory();
+    if (!directory || !foundation::isSafeFileName(domain)) return std::nullopt;
+    return *directory + "/" + std::string(domain) + ".json";
+}
 
 std::unique_ptr<UserDefaultsService> makeUserDefaultsService() {
     return std::make_unique<Service>();

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <memory>
+#include <optional>
 #include <string>
 #include <string_view>
 
@@ -28,6 +29,10 @@ class UserDefaultsService {
     virtual ~UserDefaultsService() = default;
     virtual std::unique_ptr<UserDefaults> openDomain(std::string_view domain) = 0;
 };
+
+/// The file of that domain; `nullopt` when the environment does not tell where it is, or is not to be
+/// trusted.
+std::optional<std::string> domainFile(std::string_view domain);
 
 /// The defaults of the user who runs this process.
 std::unique_ptr<UserDefaultsService> makeUserDefaultsService();

@@ -5,6 +5,8 @@
 #include <algorithm>
 #include <utility>
 
+#include "foundation/stack_guard.h"
+
 namespace pinwell::foundation {
 
 SerialQueue::SerialQueue(std::string name) : thread_([this] { run(); }) {
@@ -48,6 +50,7 @@ void SerialQueue::sync(const std::function<void()>& work) {
 }
 
 void SerialQueue::run() {
+    const StackGuard guard;
     std::unique_lock lock(mutex_);
     while (true) {
         changed_.wait(lock, [this] { return stopping_ || !work_.empty(); });

@@ -12,7 +12,7 @@
 namespace pinwell::foundation {
 namespace {
 
-constexpr std::array kDeferred{SIGHUP, SIGINT, SIGTERM};
+constexpr std::array kDeferred{SIGHUP, SIGINT, SIGTERM, SIGXCPU};
 
 // A handler is given nothing but its signal's number: what it leaves, and what shall be put back when it has
 // done, has to stand where it can find it.

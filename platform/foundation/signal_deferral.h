@@ -3,8 +3,8 @@
 
 namespace pinwell::foundation {
 
-/// For as long as it lives, SIGHUP, SIGINT and SIGTERM have no effect; those that came have it when it dies.
-/// A signal that the process ignores stays ignored.
+/// For as long as it lives, SIGHUP, SIGINT, SIGTERM and SIGXCPU have no effect; those that came have it when
+/// it dies. A signal that the process ignores stays ignored.
 ///
 /// It changes what the signals do, and not which are blocked: a mask is each thread's own, and a signal that
 /// is meant for the process ends it through any thread that does not block it, a parked main thread for

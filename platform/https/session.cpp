@@ -10,6 +10,7 @@
 #include <thread>
 
 #include "foundation/process.h"
+#include "foundation/stack_guard.h"
 #include "https/challenge.h"
 #include "https/download_file.h"
 #include "https/redirect.h"
@@ -134,6 +135,7 @@ class NetworkSession : public Session {
 
   private:
     void work() {
+        const foundation::StackGuard guard;
         // A connection that the peer has closed must show as a failed write, not end the process.
         sigset_t signals;
         sigemptyset(&signals);

@@ -3,6 +3,7 @@
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
+#include <sys/vfs.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -83,15 +84,24 @@ std::string lastReason() {
     return std::generic_category().message(errno);
 }
 
+// A rule holds for one inode. Network file systems of this sort make up a new one whenever they like.
+bool keepsInodes(int place) {
+    constexpr std::uint32_t kPlan9 = 0x01021997;  // linux/magic.h
+    struct statfs fileSystem {};
+    return fstatfs(place, &fileSystem) != 0 || static_cast<std::uint32_t>(fileSystem.f_type) != kPlan9;
+}
+
 std::optional<std::string> addRule(int ruleset, const FileRule& rule, std::uint64_t known) {
     const FileDescriptor place(open(rule.path.c_str(), O_PATH | O_CLOEXEC));
     struct stat status {};
     if (!place || fstat(place.get(), &status) != 0) return std::nullopt;  // nothing there to give rights to
+    if (!keepsInodes(place.get())) return rule.path + ": the file system (9P) does not keep it";
     PathRule added;
     added.rights = (rule.access == Access::write ? kWriteRights : kReadRights) & known;
     if (!S_ISDIR(status.st_mode)) added.rights &= kRightsToOneFile;
     added.parent = place.get();
     if (syscall(SYS_landlock_add_rule, ruleset, kPathRule, &added, 0U) == 0) return std::nullopt;
+    if (errno == EBADFD) return std::nullopt;  // a pipe or a socket, which may be read in any case
     return rule.path + ": " + lastReason();
 }
 

@@ -1,10 +1,21 @@
 // The files that the libraries of a process look for while it runs.
 
+#include <dlfcn.h>
 #include <glob.h>
+#include <pwd.h>
+#include <unistd.h>
 
 #include <algorithm>
+#include <array>
+#include <cstddef>
+#include <filesystem>
+#include <memory>
+#include <new>
+#include <sstream>
 #include <string>
 #include <string_view>
+#include <system_error>
+#include <vector>
 
 #include "foundation/bytes.h"
 #include "foundation/file_io.h"
@@ -14,10 +25,12 @@
 namespace pinwell::sandbox {
 namespace {
 
+namespace fs = std::filesystem;
 using foundation::secureEnvironment;
 
 // Far above what any system has: a few lines.
-constexpr std::size_t kMaximumLoaderConfiguration = std::size_t{64} * 1024;
+constexpr std::size_t kMaximumConfiguration = std::size_t{64} * 1024;
+constexpr std::string_view kBlank = " \t";
 
 void addReadable(FileRules& rules, std::string path) {
     if (path.starts_with('/')) rules.push_back({std::move(path), Access::read});
@@ -51,8 +64,7 @@ void addIncluded(FileRules& rules, const std::string& pattern, int depth) {
 void addLoaderConfiguration(FileRules& rules, const std::string& path, int depth) {
     constexpr int kDeepestInclude = 4;
     constexpr std::string_view kInclude = "include";
-    constexpr std::string_view kBlank = " \t";
-    const auto bytes = foundation::readSmallFile(path, kMaximumLoaderConfiguration);
+    const auto bytes = foundation::readSmallFile(path, kMaximumConfiguration);
     if (!bytes || depth > kDeepestInclude) return;
     const std::string contents = foundation::toString(*bytes);
     std::string_view text = contents;
@@ -75,7 +87,80 @@ void addLoaderConfiguration(FileRules& rules, const std::string& path, int depth
     }
 }
 
+constexpr std::size_t kMaximumLinks = 10'000;
+constexpr int kLinkDepth = 2;
+constexpr int kMaximumHops = 40;  // as the kernel's own
+
+void addLinks(FileRules& rules, const fs::path& directory, int depth) {
+    std::error_code failure;
+    for (fs::directory_iterator entry(directory, failure); !failure && entry != fs::directory_iterator();
+         entry.increment(failure)) {
+        std::error_code unknown;
+        if (entry->is_symlink(unknown)) {
+            if (rules.size() > kMaximumLinks) return;
+            rules.push_back({entry->path().native(), Access::read});
+        }
+        if (depth < kLinkDepth && entry->is_directory(unknown)) addLinks(rules, entry->path(), depth + 1);
+    }
+}
+
+// Where the loader looks, in its order: also what is linked into the program itself.
+void addLoaderDirectories(FileRules& rules) {
+    void* const program = dlopen(nullptr, RTLD_LAZY);
+    Dl_serinfo size{};
+    if (program == nullptr || dlinfo(program, RTLD_DI_SERINFOSIZE, &size) != 0) return;
+    const auto room = std::make_unique<std::byte[]>(size.dls_size);
+    auto* const found = new (room.get()) Dl_serinfo(size);
+    if (dlinfo(program, RTLD_DI_SERINFOSIZE, found) != 0 || dlinfo(program, RTLD_DI_SERINFO, found) != 0)
+        return;
+    for (unsigned i = 0; i < found->dls_cnt; ++i) addReadable(rules, found->dls_serpath[i].dls_name);
+}
+
+// The services of a line such as "hosts: files mdns4_minimal [NOTFOUND=return] dns".
+std::vector<std::string> hostServices(const std::string& switchFile) {
+    constexpr std::string_view kHosts = "hosts:";
+    std::vector<std::string> services;
+    const auto bytes = foundation::readSmallFile(switchFile, kMaximumConfiguration);
+    if (!bytes) return services;
+    std::istringstream lines(foundation::toString(*bytes));
+    for (std::string line; std::getline(lines, line);) {
+        line = line.substr(0, line.find('#'));
+        const std::size_t start = std::min(line.find_first_not_of(kBlank), line.size());
+        if (!std::string_view(line).substr(start).starts_with(kHosts)) continue;
+        std::istringstream words(line.substr(start + kHosts.size()));
+        for (std::string word; words >> word;)
+            if (word.find_first_of("[]=") == std::string::npos) services.push_back(word);
+    }
+    return services;
+}
+
+bool isKnownService(const std::string& name) {
+    constexpr std::array<std::string_view, 13> kKnown{
+        "files", "dns", "resolve", "myhostname",   "mymachines",    "mdns",         "mdns4",
+        "mdns6", "sss", "compat",  "mdns_minimal", "mdns4_minimal", "mdns6_minimal"};
+    return std::find(kKnown.begin(), kKnown.end(), name) != kKnown.end();
+}
+
 }  // namespace
+
+FileRules filesWithLinks(const std::string& directory) {
+    FileRules rules{{directory, Access::read}};
+    addLinks(rules, directory, 0);
+    return rules;
+}
+
+FileRules fileAndItsLinks(const std::string& path, Access access) {
+    FileRules rules{{path, access}};
+    fs::path link = path;
+    std::error_code failure;
+    for (int hops = 0; hops < kMaximumHops; ++hops) {
+        const fs::path target = fs::read_symlink(link, failure);
+        if (failure) break;
+        link = link.parent_path() / target;  // the target itself if it is absolute
+        rules.push_back({link.parent_path().native(), access});
+    }
+    return rules;
+}
 
 FileRules libraryFiles() {
     FileRules rules;
@@ -97,6 +182,8 @@ FileRules libraryFiles() {
                                    "/etc/locale.alias",
                                    "/etc/ssl/openssl.cnf",
                                    "/etc/ssl/openssl.cnf.d",
+                                   "/etc/ssl/fipsmodule.cnf",
+                                   "/etc/pki/tls/fipsmodule.cnf",
                                    "/etc/pki/tls/openssl.cnf",
                                    "/etc/pki/tls/openssl.d",
                                    "/etc/crypto-policies",
@@ -113,33 +200,42 @@ FileRules libraryFiles() {
                                    "/sys/kernel/mm/transparent_hugepage"})
         addReadable(rules, path);
     rules.push_back({"/dev/null", Access::write});
-    for (const char* const variable :
-         {"LD_LIBRARY_PATH", "OPENSSL_CONF", "OPENSSL_MODULES", "OPENSSL_ENGINES", "GCONV_PATH", "LOCPATH"})
+    for (const char* const variable : {"LD_LIBRARY_PATH", "OPENSSL_CONF", "OPENSSL_CONF_INCLUDE",
+                                       "OPENSSL_MODULES", "OPENSSL_ENGINES", "GCONV_PATH", "LOCPATH"})
         addVariable(rules, variable);
+    addLoaderDirectories(rules);
     addLoaderConfiguration(rules, "/etc/ld.so.conf", 0);
     return rules;
 }
 
-FileRules nameResolutionFiles() {
+FileRules nameResolutionFiles(const std::string& switchFile) {
     FileRules rules;
-    for (const char* const path :
-         {"/etc/resolv.conf", "/etc/hosts", "/etc/host.conf", "/etc/nsswitch.conf", "/etc/gai.conf",
-          "/etc/services", "/etc/protocols", "/etc/networks", "/etc/hostname", "/etc/passwd",
-          "/etc/mdns.allow", "/etc/nscd.conf", "/run/systemd/resolve", "/run/nscd", "/var/cache/nscd",
-          "/var/lib/sss/mc", "/var/lib/sss/pubconf"})
+    for (const char* const path : {"/etc/resolv.conf",    "/etc/hosts",           "/etc/host.conf",
+                                   "/etc/nsswitch.conf",  "/etc/gai.conf",        "/etc/services",
+                                   "/etc/protocols",      "/etc/networks",        "/etc/hostname",
+                                   "/etc/machine-info",   "/etc/passwd",          "/etc/mdns.allow",
+                                   "/etc/nscd.conf",      "/run/systemd/resolve", "/run/systemd/machines",
+                                   "/run/NetworkManager", "/run/resolvconf",      "/run/connman",
+                                   "/run/nscd",           "/var/cache/nscd",      "/var/lib/sss/mc",
+                                   "/var/lib/sss/pubconf"})
         addReadable(rules, path);
     addVariable(rules, "HOSTALIASES");
+    const auto services = hostServices(switchFile);
+    if (!std::all_of(services.begin(), services.end(), isKnownService))
+        for (const char* const path : {"/etc", "/run", "/usr", "/var"}) addReadable(rules, path);
     return rules;
 }
 
 FileRules typeDatabaseFiles() {
     FileRules rules;
-    const auto home = secureEnvironment("HOME");
+    auto home = secureEnvironment("HOME");
     const auto own = secureEnvironment("XDG_DATA_HOME");
     if (own && !own->empty()) {
         addReadable(rules, *own + "/mime");
-    } else if (home) {
-        addReadable(rules, *home + "/.local/share/mime");
+    } else {
+        if (!home)
+            if (const passwd* const user = getpwuid(getuid()); user != nullptr) home = user->pw_dir;
+        if (home) addReadable(rules, *home + "/.local/share/mime");
     }
     const auto system = secureEnvironment("XDG_DATA_DIRS");
     addList(rules, system && !system->empty() ? *system : "/usr/local/share:/usr/share", "/mime");

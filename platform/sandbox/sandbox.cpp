@@ -6,6 +6,7 @@
 #include <iterator>
 #include <utility>
 
+#include "foundation/sanitized.h"
 #include "sandbox/landlock.h"
 #include "sandbox/system_calls.h"
 
@@ -17,9 +18,14 @@ std::vector<std::string> confine(const Confinement& confinement) {
     std::vector<std::string> missing;
     // Both facilities ask for it of a process that is not the superuser's.
     if (prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) != 0) missing.emplace_back("no_new_privs is not in force");
-    const auto files = restrictFiles(confinement.files, confinement.network);
+    FileRules rules = confinement.files;
+#ifdef PINWELL_COUNTS_DIRECTORY
+    rules.push_back({PINWELL_COUNTS_DIRECTORY, Access::write});  // of a build that counts what runs
+#endif
+    const auto files = restrictFiles(rules, confinement.network);
     if (files) missing.push_back("Landlock is not in force: " + *files);
-    const auto calls = restrictCalls(confinement.calls, files ? FilesAre::open : FilesAre::restricted);
+    const auto calls =
+        restrictCalls(confinement.calls, confinement.network, files ? FilesAre::open : FilesAre::restricted);
     if (calls) missing.push_back("seccomp is not in force: " + *calls);
     return missing;
 }
@@ -35,7 +41,8 @@ std::vector<std::string> confine(const Confinement&) {
 void forbidCoreDumps() {
     const rlimit none{0, 0};
     setrlimit(RLIMIT_CORE, &none);
-    prctl(PR_SET_DUMPABLE, 0, 0, 0, 0);
+    // The leak checker of a sanitized build traces the process at its end.
+    if (!foundation::kSanitized) prctl(PR_SET_DUMPABLE, 0, 0, 0, 0);
 }
 
 void append(FileRules& rules, FileRules more) {

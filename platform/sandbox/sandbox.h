@@ -34,14 +34,17 @@ struct FileRule {
 using FileRules = std::vector<FileRule>;
 
 enum class Network {
-    none,     ///< no TCP; with Calls::reading, no socket at all
+    none,     ///< no TCP, and no sockets but those of the file system; with Calls::reading, no socket at all
     connect,  ///< TCP connections may be opened, not received
     listen,   ///< both
 };
 
 enum class Calls {
     /// All but those that start programs, look into other processes, mount, trace, load code into the kernel,
-    /// change identity, or set the machine up. Sockets are of the Unix, IPv4, IPv6 and routing families.
+    /// change identity, or set the machine up. Sockets are of the Unix family, and with a network of the
+    /// IPv4,
+    /// IPv6 and routing families too; except where the processor has one call for all that is done with
+    /// sockets, which cannot be told apart.
     service,
     /// Only those that reading files, memory, threads and time need. No socket, no signal to another process,
     /// no change of any file, not even of its mode or its times.
@@ -66,14 +69,24 @@ std::vector<std::string> confine(const Confinement& confinement);
 /// process that holds private keys.
 void forbidCoreDumps();
 
+/// A directory to be read, with what the symbolic links in it and in its directories, two levels deep, lead
+/// to: certificates are often links to where a package keeps them. Directories that are links count like
+/// others. At most ten thousand links.
+FileRules filesWithLinks(const std::string& directory);
+
+/// A file that is read again while the process runs, and may be another file by then: beside the file, the
+/// directories that the links on its way lead to.
+FileRules fileAndItsLinks(const std::string& path, Access access = Access::read);
+
 /// Shared libraries and data that the process's own libraries look for while it runs: the loader's
-/// directories (LD_LIBRARY_PATH included), the configuration of OpenSSL, locales, time zones, devices without
-/// contents, and /proc/self.
+/// directories (LD_LIBRARY_PATH and what is linked into the program included), the configuration of OpenSSL,
+/// locales, time zones, devices without contents, and /proc/self.
 FileRules libraryFiles();
 
-/// What finding the addresses of a host name reads: resolv.conf, hosts, nsswitch.conf and the caches of its
-/// services.
-FileRules nameResolutionFiles();
+/// What finding the addresses of a host name reads: resolv.conf, hosts, nsswitch.conf and the files of the
+/// services that it names (`switchFile`, nsswitch.conf(5)). A service that is not known may read /etc, /run,
+/// /usr and /var.
+FileRules nameResolutionFiles(const std::string& switchFile = "/etc/nsswitch.conf");
 
 /// The shared MIME database: $XDG_DATA_HOME and $XDG_DATA_DIRS.
 FileRules typeDatabaseFiles();

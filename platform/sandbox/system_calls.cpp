@@ -1,6 +1,7 @@
 #include "sandbox/system_calls.h"
 
 #include <asm/ioctls.h>
+#include <asm/termbits.h>
 #include <fcntl.h>
 #include <sched.h>
 #include <seccomp.h>
@@ -16,22 +17,13 @@
 #include <system_error>
 
 #include "foundation/handle.h"
+#include "foundation/sanitized.h"
 
 namespace pinwell::sandbox {
 namespace {
 
 // The leak checker of a sanitized build forks at the end and traces its parent; its reports start a program.
-#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
-constexpr bool kSanitized = true;
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
-constexpr bool kSanitized = true;
-#else
-constexpr bool kSanitized = false;
-#endif
-#else
-constexpr bool kSanitized = false;
-#endif
+using foundation::kSanitized;
 
 using Names = std::span<const char* const>;
 
@@ -73,12 +65,14 @@ constexpr std::array kReading{
     "fcntl64", "dup", "dup2", "dup3", "pipe2", "eventfd2", "poll", "ppoll", "ppoll_time64", "select",
     "_newselect", "pselect6", "pselect6_time64", "umask",
     // memory
-    "brk", "mmap", "mmap2", "munmap", "mremap", "mprotect", "madvise", "mincore", "membarrier",
+    "brk", "mmap", "mmap2", "map_shadow_stack", "mseal", "munmap", "mremap", "mprotect", "madvise", "mincore",
+    "membarrier",
     // threads and signals of the process itself
-    "futex", "futex_time64", "set_robust_list", "get_robust_list", "set_tid_address", "rseq", "arch_prctl",
-    "sched_getaffinity", "sched_yield", "sched_getparam", "sched_getscheduler", "getcpu", "gettid",
-    "restart_syscall", "sigaltstack", "rt_sigaction", "rt_sigprocmask", "rt_sigreturn", "rt_sigpending",
-    "rt_sigsuspend", "rt_sigtimedwait", "sigreturn", "exit", "exit_group",
+    "futex", "futex_time64", "futex_wait", "futex_wake", "futex_waitv", "futex_requeue", "set_robust_list",
+    "get_robust_list", "set_tid_address", "rseq", "arch_prctl", "sched_getaffinity", "sched_yield",
+    "sched_getparam", "sched_getscheduler", "getcpu", "gettid", "restart_syscall", "sigaltstack",
+    "rt_sigaction", "rt_sigprocmask", "rt_sigreturn", "rt_sigpending", "rt_sigsuspend", "rt_sigtimedwait",
+    "sigreturn", "exit", "exit_group",
     // time
     "clock_gettime", "clock_gettime64", "clock_getres", "clock_getres_time64", "clock_nanosleep",
     "clock_nanosleep_time64", "nanosleep", "gettimeofday", "time", "times",
@@ -93,8 +87,15 @@ constexpr std::uint64_t kLowWord = 0xFFFFFFFF;  // what the kernel looks at of a
 constexpr std::uint64_t kOpenToWrite =
     O_ACCMODE | O_CREAT | O_TRUNC | (static_cast<unsigned>(O_TMPFILE) & ~static_cast<unsigned>(O_DIRECTORY));
 constexpr std::array<std::uint64_t, 2> kTerminalInput{TIOCSTI, TIOCLINUX};
+#ifdef TCGETS2
+constexpr std::array<std::uint64_t, 3> kTerminalQuestions{TCGETS, TCGETS2, TIOCGWINSZ};
+#else
 constexpr std::array<std::uint64_t, 2> kTerminalQuestions{TCGETS, TIOCGWINSZ};
+#endif
 constexpr std::uint64_t kNameMemory = 0x53564d41;  // PR_SET_VMA, of Linux 5.17
+
+constexpr std::uint32_t kRefuse = SCMP_ACT_ERRNO(EPERM);
+constexpr std::uint32_t kUnknown = SCMP_ACT_ERRNO(ENOSYS);
 
 using Filter = foundation::Handle<void, seccomp_release>;
 
@@ -122,6 +123,8 @@ class Rules {
     // Returns an errno value; 0 when the filter is in force.
     int load() {
         if (failure_ != 0) return failure_;
+        // Calls of another architecture, of 32-bit programs for instance, have other numbers.
+        seccomp_attr_set(filter_.get(), SCMP_FLTATR_ACT_BADARCH, kUnknown);
         seccomp_attr_set(filter_.get(), SCMP_FLTATR_CTL_NNP, 0);       // set already
         seccomp_attr_set(filter_.get(), SCMP_FLTATR_CTL_OPTIMIZE, 2);  // a search tree, quicker at every call
         return -seccomp_load(filter_.get());
@@ -132,12 +135,16 @@ class Rules {
     int failure_ = 0;
 };
 
-constexpr std::uint32_t kRefuse = SCMP_ACT_ERRNO(EPERM);
-constexpr std::uint32_t kUnknown = SCMP_ACT_ERRNO(ENOSYS);
-
 scmp_arg_cmp is(unsigned argument, scmp_compare comparison, std::uint64_t value, std::uint64_t second = 0) {
     return {argument, comparison, value, second};
 }
+
+// Which argument of clone(2) holds the flags.
+#if defined(__s390__) || defined(__CRIS__)
+constexpr unsigned kCloneFlags = 1;
+#else
+constexpr unsigned kCloneFlags = 0;
+#endif
 
 // Threads are started by clone(2); a new process is what lacks the flag. The flags of clone3(2) lie in
 // memory, where no filter sees them; without it the C library takes clone(2).
@@ -145,22 +152,36 @@ void allowThreadsOnly(Rules& rules, Calls calls) {
     rules.add(kUnknown, "clone3");
     if (kSanitized) return;
     if (calls == Calls::reading) {
-        rules.add(SCMP_ACT_ALLOW, "clone", {is(0, SCMP_CMP_MASKED_EQ, CLONE_THREAD, CLONE_THREAD)});
+        rules.add(SCMP_ACT_ALLOW, "clone", {is(kCloneFlags, SCMP_CMP_MASKED_EQ, CLONE_THREAD, CLONE_THREAD)});
     } else {
-        rules.add(kRefuse, "clone", {is(0, SCMP_CMP_MASKED_EQ, CLONE_THREAD, 0)});
+        rules.add(kRefuse, "clone", {is(kCloneFlags, SCMP_CMP_MASKED_EQ, CLONE_THREAD, 0)});
     }
 }
 
-void restrictSockets(Rules& rules) {
-    // Every family but Unix (1), IPv4 (2), IPv6 (10) and netlink (16), and of netlink all but routing (0).
-    for (std::uint64_t family = 0; family < AF_NETLINK; ++family)
-        if (family != AF_UNIX && family != AF_INET && family != AF_INET6)
-            rules.add(kRefuse, "socket", {is(0, SCMP_CMP_EQ, family)});
-    rules.add(kRefuse, "socket", {is(0, SCMP_CMP_GT, AF_NETLINK)});
-    rules.add(kRefuse, "socket", {is(0, SCMP_CMP_EQ, AF_NETLINK), is(2, SCMP_CMP_NE, 0)});
+// Whether sockets have one call for all that is done with them, as on s390x and i386. Its arguments lie in
+// memory, so that a rule on them would meet every socket.
+bool hasOneCallForSockets() {
+    return seccomp_syscall_resolve_name("socketcall") >= 0;
 }
 
-Rules serviceRules() {
+void restrictSockets(Rules& rules, Network network) {
+    if (hasOneCallForSockets()) return;
+    // Every family but Unix (1), and with a network IPv4 (2), IPv6 (10) and netlink (16), and of netlink all
+    // but routing (0).
+    const bool hasNetwork = network != Network::none;
+    for (std::uint64_t family = 0; family < AF_NETLINK; ++family) {
+        const bool isOfTheNetwork = family == AF_INET || family == AF_INET6;
+        if (family != AF_UNIX && !(hasNetwork && isOfTheNetwork))
+            rules.add(kRefuse, "socket", {is(0, SCMP_CMP_EQ, family)});
+    }
+    rules.add(kRefuse, "socket", {is(0, SCMP_CMP_GT, AF_NETLINK)});
+    if (hasNetwork)
+        rules.add(kRefuse, "socket", {is(0, SCMP_CMP_EQ, AF_NETLINK), is(2, SCMP_CMP_NE, 0)});
+    else
+        rules.add(kRefuse, "socket", {is(0, SCMP_CMP_EQ, AF_NETLINK)});
+}
+
+Rules serviceRules(Network network) {
     Rules rules(SCMP_ACT_ALLOW);
     for (const char* const name : kForbidden) {
         if (kSanitized && std::string_view(name).starts_with("process_vm_")) continue;
@@ -169,7 +190,7 @@ Rules serviceRules() {
     }
     if (!kSanitized) rules.add(kRefuse, kForbiddenUnlessSanitized);
     allowThreadsOnly(rules, Calls::service);
-    restrictSockets(rules);
+    restrictSockets(rules, network);
     const auto self = static_cast<std::uint64_t>(getpid());
     for (const char* const call : {"kill", "tgkill", "rt_sigqueueinfo", "rt_tgsigqueueinfo"})
         if (!kSanitized) rules.add(kRefuse, call, {is(0, SCMP_CMP_NE, self)});
@@ -185,6 +206,9 @@ Rules readingRules(FilesAre files) {
     rules.add(SCMP_ACT_ALLOW, kReading);
     if (kSanitized) rules.add(SCMP_ACT_ALLOW, kNeededBySanitizers);
     allowThreadsOnly(rules, Calls::reading);
+#ifdef PINWELL_COUNTS_DIRECTORY
+    rules.add(SCMP_ACT_ALLOW, "openat");  // the counts are written at the end of the process
+#endif
     rules.add(SCMP_ACT_ALLOW, "open", {is(1, SCMP_CMP_MASKED_EQ, kOpenToWrite, 0)});
     rules.add(SCMP_ACT_ALLOW, "openat", {is(2, SCMP_CMP_MASKED_EQ, kOpenToWrite, 0)});
     // Its flags lie in memory too.
@@ -202,10 +226,12 @@ Rules readingRules(FilesAre files) {
 
 }  // namespace
 
-std::optional<std::string> restrictCalls(Calls calls, FilesAre files) {
-    Rules rules = calls == Calls::reading ? readingRules(files) : serviceRules();
+std::optional<std::string> restrictCalls(Calls calls, Network network, FilesAre files) {
+    Rules rules = calls == Calls::reading ? readingRules(files) : serviceRules(network);
     const int failure = rules.load();
     if (failure == 0) return std::nullopt;
+    // What the library says of every refusal of the kernel's.
+    if (failure == ECANCELED) return "the kernel refuses it";
     return std::generic_category().message(failure);
 }
 

@@ -13,6 +13,6 @@ enum class FilesAre { open, restricted };
 
 /// Gives up the calls that `calls` does not allow. Returns why nothing was given up; `nullopt` if they were.
 /// The process must have no_new_privs set.
-std::optional<std::string> restrictCalls(Calls calls, FilesAre files);
+std::optional<std::string> restrictCalls(Calls calls, Network network, FilesAre files);
 
 }  // namespace pinwell::sandbox

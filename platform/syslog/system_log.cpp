@@ -34,12 +34,21 @@ class HostLog final : public SystemLog {
         // is cut first need not be escaped to the end.
         const std::string entry = cut(foundation::escapeForTerminal(text.substr(0, kLongestEntry + 1)));
         const std::lock_guard lock(mutex_);
-        if (!opened_) ::openlog(kIdentity, LOG_PID, LOG_USER);
-        opened_ = true;
+        open(0);
         ::syslog(LOG_USER | LOG_ERR, "%s", entry.c_str());
     }
 
+    void connect() override {
+        const std::lock_guard lock(mutex_);
+        open(LOG_NDELAY);
+    }
+
   private:
+    void open(int option) {
+        if (!opened_) ::openlog(kIdentity, LOG_PID | option, LOG_USER);
+        opened_ = true;
+    }
+
     std::mutex mutex_;
     bool opened_ = false;
 };

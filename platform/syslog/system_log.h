@@ -19,6 +19,9 @@ class SystemLog {
     /// One entry at error level, word for word: a percent sign means itself. Control characters are escaped.
     virtual void error(std::string_view text) = 0;
 
+    /// Connects now rather than with the first entry: for a process that may not connect later.
+    virtual void connect() {}
+
     template <class... Args>
     void error(foundation::FormatString<std::type_identity_t<Args>...> format,
                const Args&... args) requires(sizeof...(Args) > 0) {
@@ -26,7 +29,7 @@ class SystemLog {
     }
 };
 
-/// syslog(3), facility user, identity "pinwell". Opened on first use.
+/// syslog(3), facility user, identity "pinwell". Connected on first use.
 std::unique_ptr<SystemLog> makeSystemLog();
 
 }  // namespace pinwell::syslog

@@ -1,0 +1,160 @@
+// How a process ends that runs away. Each is a child: what limits it cannot be lifted.
+#include "sandbox/runaway.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <sys/resource.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <array>
+#include <atomic>
+#include <cerrno>
+#include <csignal>
+#include <cstdint>
+#include <functional>
+#include <string>
+#include <system_error>
+#include <thread>
+
+#include "foundation/sanitized.h"
+#include "foundation/signal_deferral.h"
+#include "foundation/stack_guard.h"
+
+namespace pinwell::test {
+namespace {
+
+const std::atomic<std::int32_t> kStatus{65};
+
+struct End {
+    int status = 0;  // as waitpid(2) has it
+    std::string said;
+};
+
+// What a child does under a limit of one second, and how it ends.
+End endOf(const std::function<void(int output)>& body) {
+    std::array<int, 2> ends{};
+    if (pipe(ends.data()) != 0) throw std::system_error(errno, std::generic_category(), "pipe");
+    const pid_t child = fork();
+    if (child < 0) throw std::system_error(errno, std::generic_category(), "fork");
+    if (child == 0) {
+        close(ends[0]);
+        const rlimit none{0, 0};
+        setrlimit(RLIMIT_CORE, &none);
+        sandbox::limitRunaways(1, {ends[1], "time", "stack", &kStatus});
+        body(ends[1]);
+        _exit(0);
+    }
+    close(ends[1]);
+    End end;
+    std::array<char, 64> piece{};
+    for (ssize_t count = 0; (count = read(ends[0], piece.data(), piece.size())) > 0;)
+        end.said.append(piece.data(), static_cast<std::size_t>(count));
+    close(ends[0]);
+    waitpid(child, &end.status, 0);
+    return end;
+}
+
+void useProcessorTime(rlim_t seconds) {
+    rusage used{};
+    do getrusage(RUSAGE_SELF, &used);
+    while (static_cast<rlim_t>(used.ru_utime.tv_sec + used.ru_stime.tv_sec) < seconds);
+}
+
+// Deeper than any stack. Through a pointer that may change, or the compiler would make it a loop.
+int fall(int depth);
+int (*volatile further)(int) = fall;
+
+int fall(int depth) {
+    std::array<volatile char, 4096> frame{};
+    frame[0] = static_cast<char>(depth);
+    return further(depth + 1) + frame[0];
+}
+
+TEST(Runaway, ThatUsesUpItsProcessorTimeEndsWithOneLine) {
+    const End end = endOf([](int) { useProcessorTime(10); });
+    ASSERT_TRUE(WIFEXITED(end.status));
+    EXPECT_EQ(WEXITSTATUS(end.status), 65);
+    EXPECT_EQ(end.said, "time\n");
+}
+
+TEST(Runaway, EndsWhenTheWriteThatItIsInHasEnded) {
+    const End end = endOf([](int output) {
+        const foundation::SignalDeferral writing;
+        raise(SIGXCPU);
+        [[maybe_unused]] const ssize_t written = write(output, "written\n", 8);
+    });
+    EXPECT_EQ(WEXITSTATUS(end.status), 65);
+    EXPECT_EQ(end.said, "written\ntime\n");
+}
+
+TEST(Runaway, SaysNothingIfItMayNot) {
+    const End end = endOf([](int) {
+        sandbox::limitRunaways(1, {-1, "time", "stack", &kStatus});
+        raise(SIGXCPU);
+    });
+    EXPECT_EQ(WEXITSTATUS(end.status), 65);
+    EXPECT_EQ(end.said, "");
+}
+
+TEST(Runaway, ThatUsesUpItsStackEndsWithOneLine) {
+    if (foundation::kSanitized) GTEST_SKIP() << "the sanitizer has a handler of its own";
+    const End end = endOf([](int) {
+        const foundation::StackGuard guard;
+        fall(0);
+    });
+    ASSERT_TRUE(WIFEXITED(end.status));
+    EXPECT_EQ(WEXITSTATUS(end.status), 65);
+    EXPECT_EQ(end.said, "stack\n");
+}
+
+TEST(Runaway, MayBeAnyThreadWithAGuard) {
+    if (foundation::kSanitized) GTEST_SKIP() << "the sanitizer has a handler of its own";
+    const End end = endOf([](int) {
+        std::thread([] {
+            const foundation::StackGuard guard;
+            fall(0);
+        }).join();
+    });
+    EXPECT_EQ(WEXITSTATUS(end.status), 65);
+    EXPECT_EQ(end.said, "stack\n");
+}
+
+TEST(Runaway, IsNoOtherCrash) {
+    if (foundation::kSanitized) GTEST_SKIP() << "the sanitizer has a handler of its own";
+    const auto ways = {std::function<void(int)>([](int) {
+                           const foundation::StackGuard guard;
+                           volatile int* volatile nowhere = nullptr;
+                           *nowhere = 1;  // NOLINT: meant to crash
+                       }),
+                       std::function<void(int)>([](int) {
+                           const foundation::StackGuard guard;
+                           raise(SIGSEGV);
+                       })};
+    for (const auto& crash : ways) {
+        const End end = endOf(crash);
+        EXPECT_TRUE(WIFSIGNALED(end.status));
+        EXPECT_EQ(WTERMSIG(end.status), SIGSEGV);
+        EXPECT_EQ(end.said, "");
+    }
+}
+
+TEST(Runaway, KeepsALowerLimitOfTheCallers) {
+    const End end = endOf([](int output) {
+        sandbox::limitRunaways(1000, {output, "time", "stack", &kStatus});
+        rlimit limit{};
+        getrlimit(RLIMIT_CPU, &limit);
+        _exit(static_cast<int>(limit.rlim_cur));
+    });
+    EXPECT_EQ(WEXITSTATUS(end.status), 1);
+}
+
+TEST(Runaway, IsAllowedMoreForALongerInput) {
+    const std::uint64_t least = sandbox::processorSecondsFor(0);
+    EXPECT_EQ(sandbox::processorSecondsFor(1000), least);
+    constexpr std::uint64_t kGibibyte = std::uint64_t{1} << 30U;
+    EXPECT_GE(sandbox::processorSecondsFor(100 * kGibibyte), least + 100 * 1024);
+}
+
+}  // namespace
+}  // namespace pinwell::test
