@@ -2,6 +2,7 @@
 
 #include "lumora-local/certificate_maker.h"
 #include "lumora-local/endpoint.h"
+#include "lumora-local/key_file.h"
 #include "lumora-local/openssl_handles.h"
 
 namespace pinwell::lumora {
@@ -40,6 +41,10 @@ std::string subjectAlternativeName(const std::vector<std::string>& hosts) {
 }
 
 }  // namespace
+
+Identity::~Identity() {
+    wipe(privateKey);
+}
 
 Authority createAuthority(const std::vector<std::string>& hosts, Date now) {
     const CertificateProfile rootProfile{.commonName = "Lumora Local Root",

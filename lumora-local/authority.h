@@ -11,6 +11,7 @@
 
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "foundation/date.h"
@@ -21,8 +22,15 @@ inline constexpr std::string_view kTicketIntermediateMarkerOid = "1.2.840.177245
 inline constexpr std::string_view kTicketSignerMarkerOid = "1.2.840.177245.100.6.1.30";
 inline constexpr std::string_view kServerMarkerOid = "1.2.840.177245.100.6.27.2";
 
-/// A certificate and its private key, both PEM.
+/// A certificate and its private key, both PEM. The key is wiped when the identity goes.
 struct Identity {
+    Identity(std::string itsCertificate, std::string itsPrivateKey)
+        : certificate(std::move(itsCertificate)), privateKey(std::move(itsPrivateKey)) {}
+    Identity(Identity&&) noexcept = default;
+    Identity(const Identity&) = delete;
+    Identity& operator=(const Identity&) = delete;
+    ~Identity();
+
     std::string certificate;
     std::string privateKey;
 };

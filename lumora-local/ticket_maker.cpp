@@ -6,6 +6,7 @@
 
 #include "foundation/byte_writer.h"
 #include "foundation/file_io.h"
+#include "lumora-local/key_file.h"
 #include "lumora-local/openssl_handles.h"
 
 namespace pinwell::lumora {
@@ -41,7 +42,7 @@ BioHandle readPem(const std::string& path) {
     const foundation::Result<Data> bytes = foundation::readSmallFile(path, kMaximumPemSize);
     if (!bytes) throw Failure(EX_NOINPUT, bytes.error().localizedDescription());
     const int size = static_cast<int>(bytes->size());
-    BioHandle pem(BIO_new(BIO_s_secmem()));
+    BioHandle pem(BIO_new(BIO_s_mem()));
     require(pem != nullptr && BIO_write(pem.get(), bytes->data(), size) == size, "read a PEM file");
     return pem;
 }
@@ -117,9 +118,7 @@ Data encodeTicketPayload(const TicketContents& contents) {
 }
 
 TicketSigner::TicketSigner(const std::string& keyPath, const std::vector<std::string>& chainPaths) {
-    const BioHandle pem = readPem(keyPath);
-    key_.reset(PEM_read_bio_PrivateKey(pem.get(), nullptr, nullptr, nullptr), EVP_PKEY_free);
-    require(key_ != nullptr, "read the key in " + keyPath);
+    key_.reset(readKeyFile(keyPath).release(), EVP_PKEY_free);
 
     Data certificates;
     for (const std::string& path : chainPaths) {

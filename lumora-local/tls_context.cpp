@@ -2,6 +2,7 @@
 
 #include <boost/asio/ssl/context.hpp>
 
+#include "lumora-local/key_file.h"
 #include "lumora-local/openssl_handles.h"
 
 namespace pinwell::lumora {
@@ -16,8 +17,8 @@ std::shared_ptr<boost::asio::ssl::context> load(const std::string& certificatePa
     SSL_CTX_set_mode(native, SSL_MODE_RELEASE_BUFFERS);  // an idle connection keeps no record buffers
     require(SSL_CTX_use_certificate_chain_file(native, certificatePath.c_str()) == 1,
             "use the certificate in " + certificatePath);
-    require(SSL_CTX_use_PrivateKey_file(native, keyPath.c_str(), SSL_FILETYPE_PEM) == 1,
-            "use the key in " + keyPath);
+    const KeyHandle key = readKeyFile(keyPath);
+    require(SSL_CTX_use_PrivateKey(native, key.get()) == 1, "use the key in " + keyPath);
     require(SSL_CTX_check_private_key(native) == 1, "use the key in " + keyPath);
     return context;
 }
