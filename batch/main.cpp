@@ -20,6 +20,9 @@
 #include "companion/ending_signals.h"
 #include "companion/own_temporary_directory.h"
 #include "foundation/process.h"
+#include "sandbox/sandbox.h"
+#include "src/DownloadDelegate.h"
+#include "src/confinement.h"
 #include "src/host_platform.h"
 #include "src/messages.h"
 
@@ -151,6 +154,24 @@ class Run {
     bool hasComplained_ = false;
 };
 
+// Before there is a second thread. Where the paths of a list lead is not known yet.
+void giveUpRights(const Settings& settings, const Platform& platform, const std::string& temporary) {
+    using sandbox::Access;
+    keepSecurityLibrary();
+    sandbox::Confinement rights = confinementOfRuns(settings.operation, settings.paths, platform.directory);
+    const auto access = settings.operation == kOperationStaple ? Access::write : Access::read;
+    if (settings.from) rights.files.push_back({"/", access});
+    // The report gets its name in the end, and the temporary directory goes.
+    const auto writeBeside = [&](const std::string& path) {
+        rights.files.push_back(
+            {URL::fileURLWithPath(path).deletingLastPathComponent().path(), Access::write});
+    };
+    writeBeside(temporary);
+    if (settings.junit) writeBeside(*settings.junit);
+    for (const std::string& missing : sandbox::confine(rights))
+        if (settings.isVerbose) complain(missing);
+}
+
 int runBatch(const Settings& settings, const foundation::FileDescriptor& signals) {
     // Lines are collected an artefact: a thread without one of them has nothing to print.
     verboseLevel = settings.isVerbose ? kVerbosityVerbose : kVerbosityQuiet;
@@ -184,6 +205,7 @@ int runBatch(const Settings& settings, const foundation::FileDescriptor& signals
         return EX_CANTCREAT;
     }
     const HostPlatform host([](int) {});
+    giveUpRights(settings, host.services(), temporary->path());
     Run run(settings, std::move(journal), std::move(junit));
     const int status = run.work(host.services(), *paths, signals);
     if (status == EX_OK && !settings.keepsTemporaryFiles)

@@ -24,6 +24,8 @@
 #include "gate/render.h"
 #include "gate/run.h"
 #include "sandbox/sandbox.h"
+#include "src/DownloadDelegate.h"
+#include "src/confinement.h"
 #include "src/host_platform.h"
 #include "src/messages.h"
 
@@ -158,26 +160,16 @@ void addOptions(CLI::App& app, Options& options, PolicyArguments& policy) {
 }
 
 /// What is read from here on is not trusted.
-void confine(const Options& options, const foundation::PlatformDirectory& directory) {
+void confine(const Options& options, const Platform& platform) {
     using sandbox::Access;
-    const bool isOnline = options.tickets == Options::Tickets::online;
-    sandbox::Confinement rights{.files = sandbox::libraryFiles(),
-                                .network = isOnline ? sandbox::Network::connect : sandbox::Network::none,
-                                .calls = isOnline ? sandbox::Calls::service : sandbox::Calls::reading};
+    keepSecurityLibrary();
+    platform.systemLog.connect();
+    sandbox::Confinement rights =
+        options.tickets == Options::Tickets::online
+            ? confinementOfRuns(kOperationValidate, options.paths, platform.directory)
+            : confinementOfReading(options.paths, platform.directory);
     for (const std::string& path : options.paths) rights.files.push_back({path, Access::read});
-    rights.files.push_back({directory.path(), Access::read});
     if (!options.ticketDirectory.empty()) rights.files.push_back({options.ticketDirectory, Access::read});
-    sandbox::append(rights.files, sandbox::typeDatabaseFiles());
-    if (isOnline) {
-        sandbox::append(rights.files, sandbox::nameResolutionFiles());
-        // Where large tickets are downloaded to, and where user defaults are.
-        std::error_code ignored;
-        rights.files.push_back({std::filesystem::temp_directory_path(ignored).native(), Access::write});
-        if (const char* const home = std::getenv("HOME"); home != nullptr)
-            rights.files.push_back({std::string(home) + "/.config", Access::read});
-        if (const char* const config = std::getenv("XDG_CONFIG_HOME"); config != nullptr)
-            rights.files.push_back({config, Access::read});
-    }
     // What is not in force on this kernel is none of the caller's business: the verdict is the same.
     static_cast<void>(sandbox::confine(rights));
 }
@@ -211,7 +203,7 @@ int gate(const Options& options) {
     Output attestation(options.attestation);
     if (!report.open()) return EX_CANTCREAT;
     if (!options.attestation.empty() && !attestation.open()) return EX_CANTCREAT;
-    confine(options, platform.directory);
+    confine(options, platform);
 
     std::unique_ptr<const TicketDirectory> tickets;
     if (options.tickets == Options::Tickets::directory) {

@@ -4,7 +4,9 @@
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
+#include <atomic>
 #include <csignal>
+#include <cstdint>
 #include <cstdio>
 #include <exception>
 #include <string>
@@ -15,9 +17,13 @@
 #include "companion/version.h"
 #include "foundation/format.h"
 #include "foundation/process.h"
+#include "foundation/stack_guard.h"
 #include "inspect/gather.h"
 #include "inspect/render_json.h"
 #include "inspect/render_text.h"
+#include "sandbox/runaway.h"
+#include "sandbox/sandbox.h"
+#include "src/confinement.h"
 #include "src/host_platform.h"
 #include "src/messages.h"
 
@@ -36,10 +42,31 @@ void complain(std::string_view text) {
     std::fwrite(line.data(), 1, line.size(), stderr);
 }
 
+/// From here on: what it was given is read, and nothing is written, started or connected to. A kernel that
+/// cannot see to that lets the run go on as it is.
+void giveUpRights(const Arguments& arguments, const Platform& platform) {
+    keepSecurityLibrary();
+    platform.systemLog.connect();
+    static_cast<void>(sandbox::confine(confinementOfReading(arguments.paths, platform.directory)));
+}
+
+void limitRunaways(const Arguments& arguments) {
+    static const std::atomic<std::int32_t> status{EX_NOINPUT};
+    std::uint64_t seconds = 0;
+    for (const std::string& path : arguments.paths)
+        seconds += processorSecondsForArtefact(foundation::URL::fileURLWithPath(path));
+    sandbox::limitRunaways(seconds,
+                           {STDERR_FILENO, "pinwell-inspect: gave up: it takes too much processor time",
+                            "pinwell-inspect: gave up: something is nested too deeply", &status});
+}
+
 int inspectAll(const Arguments& arguments) {
     // What the tool's own functions would say is in the report.
     verboseLevel = kVerbosityQuiet;
     const HostPlatform host([](int) {});
+    limitRunaways(arguments);
+    const foundation::StackGuard guard;
+    giveUpRights(arguments, host.services());
     const inspect::Inspector inspector(host.services());
     const bool inColor = companion::wantsColor(arguments.color, STDOUT_FILENO);
     companion::Output output(STDOUT_FILENO);

@@ -13,10 +13,12 @@
 #include "companion/version.h"
 #include "foundation/date.h"
 #include "foundation/format.h"
+#include "foundation/platform_directory.h"
 #include "foundation/process.h"
 #include "lumora-local/commands.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/history.h"
+#include "lumora-local/key_file.h"
 #include "lumora-local/pinwell_artefact_hasher.h"
 #include "lumora-local/rfc3339.h"
 #include "lumora-local/samples.h"
@@ -24,6 +26,8 @@
 #include "lumora-local/service_directory.h"
 #include "lumora-local/service_place.h"
 #include "lumora-local/sqlite_store.h"
+#include "sandbox/sandbox.h"
+#include "src/confinement.h"
 
 namespace {
 
@@ -100,6 +104,20 @@ ServiceDirectory openService(const Arguments& arguments) {
     return ServiceDirectory::open(requireDirectory(arguments.directory));
 }
 
+/// Artefacts are read beside the key that signs tickets. Before one is: what the service and the artefacts
+/// need, and no network.
+void giveUpRights(const Arguments& arguments, const ServiceDirectory& directory) {
+    using sandbox::Access;
+    keepSecurityLibrary();
+    sandbox::Confinement rights =
+        confinementOfReading(arguments.subjects, foundation::PlatformDirectory::current());
+    rights.calls = sandbox::Calls::service;
+    rights.files.push_back({directory.path(), Access::write});
+    sandbox::append(rights.files, sandbox::fileAndItsLinks(directory.storePath(), Access::write));
+    rights.files.push_back({foundation::temporaryDirectory().path(), Access::write});  // of the store
+    static_cast<void>(sandbox::confine(rights));
+}
+
 /// Runs one of the commands that change records.
 template <class Command>
 void withRegistry(const Arguments& arguments, Command&& command) {
@@ -109,6 +127,7 @@ void withRegistry(const Arguments& arguments, Command&& command) {
     const std::unique_ptr<ArtefactHasher> hasher = makePinwellArtefactHasher();
     const Registry registry{store, signer, *hasher, parseEnvironment(arguments.environment).value(),
                             nameOfCaller()};
+    giveUpRights(arguments, directory);
     const std::vector<Record> records = command(registry);
     writeText(arguments.asJson ? recordsAsJson(records) : describeRecords(records));
 }
@@ -334,7 +353,9 @@ int run(int argc, char** argv) {
 }  // namespace
 
 int main(int argc, char** argv) {
+    wipeWhatOpenSSLFrees();
     foundation::occupyStandardStreams();
+    sandbox::forbidCoreDumps();  // they would hold the keys
     // A client that has gone away is an error of one write, not the end of the service.
     std::signal(SIGPIPE, SIG_IGN);
     try {

@@ -14,6 +14,7 @@
 #include "lumora-local/file_writing.h"
 #include "lumora-local/server.h"
 #include "lumora-local/sqlite_store.h"
+#include "sandbox/sandbox.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -83,6 +84,18 @@ std::size_t connectionsThatFit() {
     return std::min<std::size_t>(ServerLimits{}.connections, fitting);
 }
 
+/// Before a byte of a client is read. Certificate and key may be links that whoever renews them points
+/// elsewhere.
+void giveUpRights(const ServiceDirectory& directory, const ServeOutput& output) {
+    sandbox::Confinement rights;
+    rights.files = sandbox::libraryFiles();
+    rights.files.push_back({directory.path(), sandbox::Access::write});
+    for (const std::string& path : {directory.serverCertificatePath(), directory.serverKeyPath()})
+        sandbox::append(rights.files, sandbox::fileAndItsLinks(path));
+    sandbox::append(rights.files, sandbox::fileAndItsLinks(directory.storePath(), sandbox::Access::write));
+    for (const std::string& missing : sandbox::confine(rights)) output.err(missing);
+}
+
 }  // namespace
 
 ServeSignals catchServeSignals() {
@@ -102,6 +115,7 @@ void serve(const ServiceDirectory& directory, const ServeOptions& options, const
     const LookupService lookups(store, directory.hosts(), endpoint);
     ServerLimits limits;
     limits.connections = connectionsThatFit();
+    giveUpRights(directory, output);
     Server server(lookups, tls, output.out, output.err, limits);
     const int hangUp = signals.reload.get();
     server.run(listener, signals.stop.get(), {{hangUp, [&tls, &output, hangUp] {

@@ -34,6 +34,7 @@ class ServiceDirectory {
     /// damaged.
     static ServiceDirectory open(const std::string& path);
 
+    const std::string& path() const noexcept { return path_; }
     std::string platformPath() const { return path_ + "/platform"; }
     std::string storePath() const { return servicePath("records.sqlite"); }
     std::string serverCertificatePath() const { return servicePath("server.pem"); }

@@ -11,7 +11,10 @@
 
 #include "foundation/process.h"
 #include "foundation/run_loop.h"
+#include "foundation/stack_guard.h"
+#include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
+#include "src/confinement.h"
 #include "src/host_platform.h"
 #include "src/messages.h"
 #include "src/run.h"
@@ -98,7 +101,14 @@ int main(int argc, char** argv) {
         printUsage();
         return kExitUsage;
     }
+    const URL artefact = URL::fileURLWithPath(path);
     const HostPlatform host([](int status) { std::exit(status); });
+    limitRun(artefact);
+    const foundation::StackGuard guard;
+    keepSecurityLibrary();
+    for (const std::string& missing :
+         sandbox::confine(confinementOfRun(operation, artefact, host.services().directory)))
+        NoisyLog("%@.", missing);
     foundation::RunLoop mainRunLoop;
-    return runOperation(operation, URL::fileURLWithPath(path), host.services(), [&] { mainRunLoop.run(); });
+    return runOperation(operation, artefact, host.services(), [&] { mainRunLoop.run(); });
 }

@@ -17,7 +17,6 @@ constexpr std::string_view kDefaultContainer = "com.ostrel.tm.ticket-delivery";
 constexpr std::string_view kProduction = "production";
 constexpr std::string_view kDevelopment = "development";
 
-constexpr std::string_view kDefaultsDomain = "com.ostrel.tm.pinwell";
 constexpr std::string_view kContainerKey = "lm-container";
 constexpr std::string_view kProductionKey = "lm-production";
 

@@ -28,6 +28,9 @@ namespace pinwell {
 /// The response header that names a request.
 inline constexpr std::string_view kRequestIdentifierHeader = "X-Ostrel-Request-UUID";
 
+/// The domain of the user defaults that are read where internal security policies are allowed.
+inline constexpr std::string_view kDefaultsDomain = "com.ostrel.tm.pinwell";
+
 /// Where records are looked up: the platform directory's host, and the container and environment of the user
 /// defaults where the build variant allows them. The error says what is wrong with platform.json.
 foundation::Result<foundation::URL> lookupURL(const Platform& platform);

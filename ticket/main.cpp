@@ -10,6 +10,9 @@
 
 #include "companion/command_line.h"
 #include "foundation/process.h"
+#include "sandbox/sandbox.h"
+#include "src/DownloadDelegate.h"
+#include "src/confinement.h"
 #include "src/host_platform.h"
 #include "src/messages.h"
 #include "ticket/commands.h"
@@ -131,6 +134,45 @@ std::optional<int> refuseUsage(const std::string& command, const Settings& setti
     return std::nullopt;
 }
 
+// What the command needs, and nothing else. Trash may be anywhere on an artefact's volume, and where the
+// names of a list lead is not known yet.
+sandbox::Confinement rightsFor(const std::string& command, const Settings& settings,
+                               const foundation::PlatformDirectory& platform) {
+    using sandbox::Access;
+    const auto directoryOf = [](const std::string& path) {
+        return URL::fileURLWithPath(path).deletingLastPathComponent().path();
+    };
+    if (command == "hash") return confinementOfReading(settings.arguments, platform);
+    if (command == "extract") {
+        sandbox::Confinement rights = confinementOfReading(settings.arguments, platform);
+        rights.calls = sandbox::Calls::service;
+        rights.files.push_back({settings.output ? directoryOf(*settings.output) : ".", Access::write});
+        return rights;
+    }
+    if (command == "fetch") {
+        sandbox::Confinement rights = confinementOfRuns(kOperationValidate, settings.arguments, platform);
+        if (settings.from) rights.files.push_back({"/", Access::read});
+        // It is made, unless it is there or is a link to another one.
+        rights.files.push_back({directoryOf(*settings.output), Access::write});
+        rights.files.push_back({*settings.output, Access::write});
+        return rights;
+    }
+    sandbox::Confinement rights = confinementOfRuns(kOperationStaple, settings.arguments, platform);
+    rights.network = sandbox::Network::none;
+    if (settings.tickets) sandbox::append(rights.files, sandbox::filesWithLinks(*settings.tickets));
+    if (settings.ticket) rights.files.push_back({*settings.ticket, Access::read});
+    if (command == "remove") rights.files.push_back({"/", Access::write});
+    return rights;
+}
+
+// Before there is a second thread.
+void giveUpRights(const std::string& command, const Settings& settings, const Platform& platform) {
+    keepSecurityLibrary();
+    platform.systemLog.connect();
+    for (const std::string& missing : sandbox::confine(rightsFor(command, settings, platform.directory)))
+        if (settings.isVerbose) companion::complain(kProgramName, missing);
+}
+
 int run(int argc, char** argv) {
     Settings settings;
     const companion::Program program = programFor(settings);
@@ -143,6 +185,7 @@ int run(int argc, char** argv) {
     // Lines are collected an artefact: what is not collected is not printed.
     verboseLevel = settings.isVerbose ? kVerbosityVerbose : kVerbosityQuiet;
     const HostPlatform host([](int) {});
+    giveUpRights(command, settings, host.services());
     if (command == "hash") return hash(settings, host.services());
     if (command == "fetch") return fetch(settings, host.services());
     if (command == "attach") return attach(settings, host.services());

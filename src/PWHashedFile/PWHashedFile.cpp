@@ -8,6 +8,21 @@
 #include "src/messages.h"
 
 namespace pinwell {
+namespace {
+
+std::atomic<std::int32_t> lastFailure{kExitNoInput};
+static_assert(std::atomic<std::int32_t>::is_always_lock_free, "a signal handler reads it");
+
+}  // namespace
+
+const std::atomic<std::int32_t>& lastRecordedFailure() noexcept {
+    return lastFailure;
+}
+
+void PWHashedFile::setAppropriateExitCode(std::int32_t code) noexcept {
+    appropriateExitCode_ = code;
+    if (code != kExitOK) lastFailure = code;
+}
 
 PWHashedFile::PWHashedFile(std::optional<URL> fileURL, const Platform& platform)
     : fileURL_(std::move(fileURL)), platform_(platform) {

@@ -2,6 +2,7 @@
 // the exit code that the run has reached so far.
 #pragma once
 
+#include <atomic>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -34,6 +35,10 @@ inline constexpr std::int32_t kExitNoPermission = 77;
 
 /// Where an operation may leave the error of the step that failed; null when the caller does not care.
 using ErrorOut = std::optional<Error>*;
+
+/// The last exit code but 0 that was recorded on any hashed file of the process; 66 before the first. Every
+/// step records its failure before it begins, so this is what a run ends with that cannot finish its step.
+const std::atomic<std::int32_t>& lastRecordedFailure() noexcept;
 
 /// A hook was called on a kind that did not override it: a programming error.
 class InternalInconsistency : public std::logic_error {
@@ -68,7 +73,7 @@ class PWHashedFile {
 
     /// The last setter wins.
     std::int32_t appropriateExitCode() const noexcept { return appropriateExitCode_; }
-    void setAppropriateExitCode(std::int32_t code) noexcept { appropriateExitCode_ = code; }
+    void setAppropriateExitCode(std::int32_t code) noexcept;
 
     /// Digest type of the cdhash; 0 until a kind sets it.
     std::uint32_t digestAlgorithm() const noexcept { return digestAlgorithm_; }
