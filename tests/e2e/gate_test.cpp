@@ -7,6 +7,7 @@
 
 #include "foundation/json.h"
 #include "foundation/value.h"
+#include "foundation/xml_parser.h"
 #include "local_service.h"
 #include "support/file_properties.h"
 
@@ -409,6 +410,49 @@ TEST_F(Gate, ReportsInTheFormsOfOthers) {
             << form;
         EXPECT_THAT(result.errors, IsEmpty()) << form;
     }
+}
+
+TEST_F(Gate, ReportsInJsonAsTheSchemaHasIt) {
+    flip(application() + "/Contents/Resources/ReadMe.txt", 0);
+    std::vector<std::string> paths = samples;
+    paths.push_back(directory / "missing");
+    writeFile(directory / "report.json",
+              std::string_view(gate({"--format", "json", "--offline"}, paths).output));
+    Command check;
+    check.executable = JSONSCHEMA_PROGRAM;
+    check.arguments = {"-i", directory / "report.json", GATE_SCHEMA};
+    const ProcessResult result = runProcess(check);
+    EXPECT_EQ(result.exitStatus, 0) << result.output << result.errors;
+}
+
+TEST_F(Gate, ReportsInXmlThatIsWellFormed) {
+    // A name that XML has no characters for.
+    const std::string odd = directory / "a<&\"'\x01\xFF.dmg";
+    std::filesystem::copy_file(image(), odd);
+    const ProcessResult result = gate({"--format", "junit", "--offline", odd, application()});
+    EXPECT_EQ(result.exitStatus, 0) << result.output;
+    struct Ignored : foundation::XMLEvents {
+        void begin(std::string_view, const foundation::XMLAttributes&) override { ++elements; }
+        void end(std::string_view) override {}
+        void text(std::string_view) override {}
+        int elements = 0;
+    } events;
+    foundation::XMLParser parser(events, foundation::XMLParser::DocumentType::refused);
+    EXPECT_NO_THROW({
+        parser.feed(foundation::asBytes(result.output));
+        parser.finish();
+    }) << result.output;
+    EXPECT_GT(events.elements, 10);
+}
+
+TEST_F(Gate, JudgesEveryArtefactOfADirectory) {
+    const std::string below = directory / "samples";
+    EXPECT_THAT(gate({"--offline", "--recursive", below}), Ended(0, testing::SizeIs(samples.size())));
+    EXPECT_EQ(gate({"--offline", below}).exitStatus, 66);
+    flip(unsignedImage(), 100);
+    EXPECT_EQ(gate({"--offline", "-r", below}).exitStatus, 65);
+    std::filesystem::create_directories(directory / "nothing");
+    EXPECT_EQ(gate({"--offline", "-r", directory / "nothing"}).exitStatus, 66);
 }
 
 TEST_F(Gate, WritesTheReportToAFile) {

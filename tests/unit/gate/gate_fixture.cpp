@@ -12,11 +12,12 @@ GateTest::GateTest() {
     writeFile(directory / "platform/roots/root.pem", chain.root.pem());
 }
 
-Result GateTest::judge(const std::string& path) const {
+Result GateTest::judge(const std::string& path, const gate::TicketDirectory* tickets) const {
+    using Tickets = gate::Options::Tickets;
     gate::Options options;
-    options.tickets = gate::Options::Tickets::offline;
+    options.tickets = tickets == nullptr ? Tickets::offline : Tickets::directory;
     options.paths = {path};
-    return gate::judgeAll({path}, options, nullptr, host_.services()).at(0);
+    return gate::judgeAll({path}, options, tickets, host_.services()).at(0);
 }
 
 void GateTest::staple(const std::string& path) const {

@@ -23,8 +23,8 @@ class GateTest : public testing::Test {
   protected:
     GateTest();
 
-    /// The result of a run over one path, without the network.
-    Result judge(const std::string& path) const;
+    /// The result of a run over one path, without the network; with `tickets`, as with --tickets.
+    Result judge(const std::string& path, const gate::TicketDirectory* tickets = nullptr) const;
     int exitStatusFor(const std::string& path) const { return gate::exitStatusOf(judge(path).verdict); }
 
     /// Staples a ticket that lists all code of the artefact. Fails the test if it cannot.
