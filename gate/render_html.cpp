@@ -20,10 +20,11 @@ section { border: 1px solid var(--line); border-left: .4rem solid var(--bad); bo
 section.good { border-left-color: var(--good); }
 section.unreachable, section.unreadable { border-left-color: var(--mild); }
 .verdict { font-weight: 600; }
-.good .verdict, .passed { color: var(--good); }
-.bad .verdict, .failed { color: var(--bad); }
-.unreachable .verdict, .unreadable, .noted { color: var(--mild); }
-table { border-collapse: collapse; width: 100%; margin-top: .6rem; font-size: .9rem; }
+.good .verdict, td.passed { color: var(--good); }
+.bad .verdict, td.failed { color: var(--bad); }
+.unreachable .verdict, .unreadable .verdict, td.unreadable, td.noted { color: var(--mild); }
+table { border-collapse: collapse; table-layout: fixed; width: 100%; margin-top: .6rem; font-size: .9rem; }
+th:nth-child(1) { width: 6rem; } th:nth-child(2) { width: 10rem; }
 th, td { text-align: left; vertical-align: top; padding: .3rem .6rem .3rem 0; border-top: 1px solid var(--line);
   overflow-wrap: anywhere; }
 td.value { font-family: ui-monospace, monospace; font-size: .85em; }
