@@ -9,17 +9,24 @@ using codesign::CodeError;
 
 namespace {
 
-constexpr std::string_view kInformation = "Info.plist";
-constexpr std::string_view kResourcesInformation = "Resources/Info.plist";
+const std::string kInformation = "Info.plist";
+const std::string kResources = "Resources";
 
-bool isFile(const DirectoryRef& root, std::string_view path) {
-    try {
-        root->fileAt(path);
-        return true;
-    } catch (const CodeError& error) {
-        if (error.status() != codesign::kStaticCodeNotFound) throw;
-        return false;
+// An entry of any kind: a link in the list's place is followed by whoever runs the software, and is a fault
+// here, not a reason to look for the list elsewhere.
+std::string propertyListOf(const BundleLayout& layout) {
+    switch (layout.kind) {
+        case BundleLayout::Kind::application:
+            return kInformation;
+        case BundleLayout::Kind::framework:
+            return joined(kResources, kInformation);
+        case BundleLayout::Kind::flat:
+            break;
     }
+    if (layout.root->kindOf(kInformation)) return kInformation;
+    const bool isBelow = layout.root->kindOf(kResources) == EntryKind::directory &&
+                         layout.root->directory(kResources)->kindOf(kInformation);
+    return isBelow ? joined(kResources, kInformation) : std::string();
 }
 
 }  // namespace
@@ -50,13 +57,7 @@ BundleLayout layoutOfBundle(const std::string& path) {
         layout.executable = executable;
         layout.root = layout.bundle;
     }
-    const bool isFramework = layout.kind == BundleLayout::Kind::framework;
-    for (const std::string_view candidate : {isFramework ? kResourcesInformation : kInformation,
-                                             isFramework ? std::string_view() : kResourcesInformation}) {
-        if (candidate.empty() || !isFile(layout.root, candidate)) continue;
-        layout.propertyList = candidate;
-        break;
-    }
+    layout.propertyList = propertyListOf(layout);
     return layout;
 }
 

@@ -23,10 +23,11 @@ struct BundleLayout {
 
     Kind kind = Kind::application;
     DirectoryRef bundle;
-    DirectoryRef root;         // of the seal
-    std::string rootPath;      // of it, below the bundle; empty if it is the bundle
-    std::string executable;    // path below the root of the seal
-    std::string propertyList;  // path below the root of the seal; empty without one
+    DirectoryRef root;       // of the seal
+    std::string rootPath;    // of it, below the bundle; empty if it is the bundle
+    std::string executable;  // path below the root of the seal
+    std::string
+        propertyList;  // where it must be, below the root of the seal; empty if a flat bundle has none
 };
 
 /// Throws codesign::CodeError: kStaticCodeNotFound if the directory has no main executable.

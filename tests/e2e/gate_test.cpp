@@ -136,6 +136,13 @@ Spoil linked(const std::string& below, const std::string& target) {
     };
 }
 
+Spoil both(const Spoil& first, const Spoil& second) {
+    return [=](const std::string& path) {
+        first(path);
+        second(path);
+    };
+}
+
 Spoil copied(const std::string& from, const std::string& to) {
     return [=](const std::string& path) {
         std::filesystem::copy_file(path + "/" + from, path + "/" + to,
@@ -248,6 +255,16 @@ const std::vector<Tampering> kApplicationRows{
      "Contents/Programs/Sample"},
     {"PropertyList", "Sample.app", byteIn("Contents/Info.plist", 300), "property list"},
     {"PropertyListRemoved", "Sample.app", removed("Contents/Info.plist"), "property list"},
+    {"PropertyListWhereAFrameworkHasIt", "Sample.app",
+     renamed("Contents/Info.plist", "Contents/Resources/Info.plist"), "property list"},
+    {"PropertyListReplacedByLink", "Sample.app",
+     both(renamed("Contents/Info.plist", "Contents/Resources/Info.plist"),
+          linked("Contents/Info.plist", "Resources/ReadMe.txt")),
+     "property list"},
+    {"PropertyListReplacedByDirectory", "Sample.app",
+     both(renamed("Contents/Info.plist", "Contents/Resources/Info.plist"),
+          [](const std::string& path) { std::filesystem::create_directory(path + "/Contents/Info.plist"); }),
+     "property list"},
     {"SealByte", "Sample.app", byteIn("Contents/_CodeSignature/CodeResources", 700), "sealed resources"},
     {"SealRemoved", "Sample.app", removed("Contents/_CodeSignature"), "sealed resources"},
     {"ResourceByte", "Sample.app", byteIn("Contents/Resources/ReadMe.txt", 0),
