@@ -204,7 +204,7 @@ int runBatch(const Settings& settings, const foundation::FileDescriptor& signals
         complain("no temporary directory can be made: " + temporary.error().localizedDescription());
         return EX_CANTCREAT;
     }
-    const HostPlatform host([](int) {});
+    const HostPlatform host([](int) {}, HostPlatform::Connections::kept);
     giveUpRights(settings, host.services(), temporary->path());
     Run run(settings, std::move(journal), std::move(junit));
     const int status = run.work(host.services(), *paths, signals);

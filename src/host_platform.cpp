@@ -1,10 +1,11 @@
 #include "src/host_platform.h"
 
+#include "https/session_options.h"
 #include "src/type_naming.h"
 
 namespace pinwell {
 
-HostPlatform::HostPlatform(std::function<void(int)> exitProcess)
+HostPlatform::HostPlatform(std::function<void(int)> exitProcess, Connections connections)
     : directory_(foundation::PlatformDirectory::current()),
       systemLog_(syslog::makeSystemLog()),
       types_(types::makeTypeService()),
@@ -12,7 +13,7 @@ HostPlatform::HostPlatform(std::function<void(int)> exitProcess)
           [this](const files::ItemFacts& facts) { return nameType(*types_, facts); })),
       codeSigning_(codesign::makeCodeSigningService()),
       trust_(trust::makeTrustService(directory_, [this](std::string_view line) { systemLog_->error(line); })),
-      https_(https::makeSessionService(*trust_)),
+      https_(https::makeSessionService(*trust_, {.keepsConnection = connections == Connections::kept})),
       userDefaults_(defaults::makeUserDefaultsService()),
       exitProcess_(std::move(exitProcess)) {}
 

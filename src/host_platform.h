@@ -12,8 +12,12 @@ namespace pinwell {
 /// environment.
 class HostPlatform {
   public:
+    /// Whether a session keeps its connection from one exchange to the next, or has a new one for each.
+    enum class Connections : bool { closed, kept };
+
     /// `exitProcess` ends the process with a status.
-    explicit HostPlatform(std::function<void(int)> exitProcess);
+    explicit HostPlatform(std::function<void(int)> exitProcess,
+                          Connections connections = Connections::closed);
     HostPlatform(const HostPlatform&) = delete;
     HostPlatform& operator=(const HostPlatform&) = delete;
 

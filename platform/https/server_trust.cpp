@@ -75,19 +75,39 @@ void messageThunk(int isWritten, int, int contentType, const void* bytes, std::s
         trust.noteOrderlyEnd();
 }
 
+void freeShare(void*, void* share, CRYPTO_EX_DATA*, int, long, void*) {
+    const std::unique_ptr<std::shared_ptr<ServerTrust>> owner(
+        static_cast<std::shared_ptr<ServerTrust>*>(share));
+}
+
+// Where a context keeps its share of the object.
+int sharePlace() {
+    static const int place = SSL_CTX_get_ex_new_index(0, nullptr, nullptr, nullptr, freeShare);
+    return place;
+}
+
 }  // namespace
 
-bool ServerTrust::install(void* context) noexcept {
+std::shared_ptr<ServerTrust> ServerTrust::install(void* context, Judge judge) noexcept {
     auto* const tls = static_cast<SSL_CTX*>(context);
-    SSL_CTX_set_cert_verify_callback(tls, verifyThunk, this);
+    std::shared_ptr<ServerTrust> trust;
+    try {
+        trust = std::make_shared<ServerTrust>(std::move(judge));
+        auto share = std::make_unique<std::shared_ptr<ServerTrust>>(trust);
+        if (SSL_CTX_set_ex_data(tls, sharePlace(), share.get()) != 1) return nullptr;
+        static_cast<void>(share.release());  // the context frees it
+    } catch (const std::exception&) {
+        return nullptr;  // the caller is C
+    }
+    SSL_CTX_set_cert_verify_callback(tls, verifyThunk, trust.get());
     SSL_CTX_set_verify(tls, SSL_VERIFY_PEER, nullptr);  // without it a refusal would be noted and passed over
     SSL_CTX_set_session_cache_mode(tls, SSL_SESS_CACHE_OFF);
     SSL_CTX_set_options(tls, SSL_OP_NO_TICKET | SSL_OP_NO_RENEGOTIATION);
     SSL_CTX_set_msg_callback(tls, messageThunk);
-    SSL_CTX_set_msg_callback_arg(tls, this);
+    SSL_CTX_set_msg_callback_arg(tls, trust.get());
     SSL_CTX_set_keylog_callback(tls,
                                 nullptr);  // the environment could have asked for the keys to be written out
-    return SSL_CTX_set_min_proto_version(tls, TLS1_2_VERSION) == 1;
+    return SSL_CTX_set_min_proto_version(tls, TLS1_2_VERSION) == 1 ? trust : nullptr;
 }
 
 bool ServerTrust::verify(void* storeContext) noexcept {
@@ -95,7 +115,8 @@ bool ServerTrust::verify(void* storeContext) noexcept {
     agreedOnHTTP2_ = hasAgreedOnHTTP2(context);
     bool trusted = false;
     try {
-        if (const auto certificates = peerCertificates(context)) trusted = judge_(*certificates);
+        const auto certificates = peerCertificates(context);
+        if (certificates && judge_) trusted = judge_(*certificates);
     } catch (const std::exception&) {
         trusted = false;  // the caller is C
     }

@@ -7,6 +7,7 @@
 #pragma once
 
 #include <functional>
+#include <memory>
 #include <vector>
 
 #include "foundation/bytes.h"
@@ -22,13 +23,16 @@ class ServerTrust {
     /// thread that carries out the handshake.
     using Judge = std::function<bool(const std::vector<foundation::Data>& certificates)>;
 
+    /// Makes one for a fresh context (an SSL_CTX), which shares it: the object lives at least as long as the
+    /// connection does. Returns null if the context could not be made as strict as it has to be.
+    static std::shared_ptr<ServerTrust> install(void* context, Judge judge) noexcept;
+
     explicit ServerTrust(Judge judge) : judge_(std::move(judge)) {}
     ServerTrust(const ServerTrust&) = delete;
     ServerTrust& operator=(const ServerTrust&) = delete;
 
-    /// Into a fresh context (an SSL_CTX), which must not be used longer than this object lives. False when
-    /// the context could not be made as strict as it has to be.
-    bool install(void* context) noexcept;
+    /// From now on every server is refused: whoever judged has gone.
+    void forgetJudge() noexcept { judge_ = nullptr; }
 
     /// The judge was asked, and accepted each time.
     bool accepted() const noexcept { return asked_ && !refused_; }

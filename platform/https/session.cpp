@@ -111,9 +111,10 @@ class SessionTask : public Task, public std::enable_shared_from_this<SessionTask
     std::optional<HTTPResponse> response_;
 };
 
-// One worker thread carries out the tasks, one after another. It waits while a callback runs, and holds no
+// One worker thread carries out the tasks, one after another. It waits while a callback runs, and uses no
 // object of the transfer or TLS libraries then unless the callback is a challenge: the process may be ended
-// by exit() in any callback, and what those libraries take down at exit must not be in use.
+// by exit() in any callback, and what those libraries take down at exit must not be in use. A connection that
+// is kept is held, and rests.
 class NetworkSession : public Session {
   public:
     NetworkSession(SessionDelegate& delegate, trust::TrustService& trust, const SessionOptions& options)
@@ -149,6 +150,7 @@ class NetworkSession : public Session {
                 carryOutData(*task);
             task->setState(TaskState::completed);
         }
+        connection_.drop();  // where it was used
     }
 
     void carryOutData(SessionTask& task) {
@@ -197,7 +199,7 @@ class NetworkSession : public Session {
     // Follows redirects to the answer that is to be had in the end.
     Result<HTTPResponse> fetch(Request request, std::size_t maximumBody, BodySink& sink) {
         const TransferContext context{
-            options_, interrupt_, maximumBody,
+            options_, connection_, interrupt_, maximumBody,
             [this](const std::string& host, const std::vector<Data>& certificates) {
                 return challengeDelegate({*this, delegate_, callbacks_, trust_}, host, certificates);
             }};
@@ -220,6 +222,7 @@ class NetworkSession : public Session {
     trust::TrustService& trust_;
     const SessionOptions options_;
     const std::shared_ptr<Inbox> inbox_ = std::make_shared<Inbox>();
+    ConnectionSlot connection_;  // the worker's alone
     Interrupt interrupt_;
     foundation::SerialQueue callbacks_{"https-callbacks"};
     std::thread worker_;  // last: it uses all of the above

@@ -30,6 +30,14 @@ struct SessionOptions {
     std::chrono::milliseconds pollInterval = std::chrono::seconds(1);  // how often the clock is looked at
     std::function<Clock::time_point()> now = Clock::now;
 
+    /// Keeps the connection of an exchange for the session's next one to the same host and port, which is not
+    /// judged again then.
+    bool keepsConnection = false;
+
+    /// For how long at most: without an exchange, and in all.
+    std::chrono::seconds keepsIdleConnectionFor{60};
+    std::chrono::seconds keepsConnectionFor{300};
+
     /// Where downloads are kept; when empty, the user's temporary directory.
     std::function<URL()> temporaryDirectory = {};
 };

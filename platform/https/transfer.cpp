@@ -23,7 +23,6 @@ namespace {
 using foundation::Result;
 
 using EasyHandle = foundation::Handle<CURL, curl_easy_cleanup>;
-using MultiHandle = foundation::Handle<CURLM, curl_multi_cleanup>;
 using HeaderListHandle = foundation::Handle<curl_slist, curl_slist_free_all>;
 
 // Not before the first transfer: it costs start-up time, and most runs that fail never get here.
@@ -61,26 +60,42 @@ class Exchange {
           sink_(sink),
           target_(std::move(target)),
           head_(context.options.maximumHeaderBytes, context.options.maximumHeaderFields),
-          serverTrust_([this](const std::vector<Data>& certificates) { return judge(certificates); }) {}
+          multi_(context.connection.handleFor(target_)),
+          bytesUsed_(bytesArrived()) {}
 
     Result<TransferAnswer> run() {
         headers_ = headerList(request_);
-        if (!libraryIsReady() || !easy_ || !multi_ || !configure()) {
+        if (!easy_ || multi_ == nullptr || !configure()) {
+            context_.connection.drop();
             const auto result = setupResult_ == CURLE_OK ? CURLE_FAILED_INIT : setupResult_;
             return makeError(
                 URLErrorCode::invalidConfiguration,
                 std::string("The transfer could not be set up: ") + curl_easy_strerror(result) + ".");
         }
         lastActivity_ = context_.options.now();
-        if (curl_multi_add_handle(multi_.get(), easy_.get()) != CURLM_OK)
+        if (curl_multi_add_handle(multi_, easy_.get()) != CURLM_OK) {
+            context_.connection.drop();
             return makeError(URLErrorCode::unknown, "The transfer could not be started.");
+        }
         const CURLcode result = drive();
         Result<TransferAnswer> outcome = answer(result);
-        curl_multi_remove_handle(multi_.get(), easy_.get());
+        curl_socket_t socket = CURL_SOCKET_BAD;
+        curl_easy_getinfo(easy_.get(), CURLINFO_ACTIVESOCKET, &socket);
+        curl_multi_remove_handle(multi_, easy_.get());
+        easy_.reset();
+        if (outcome && context_.options.keepsConnection)
+            context_.connection.keep(socket);
+        else
+            context_.connection.drop();
         return outcome;
     }
 
   private:
+    const ServerTrust* trust() const noexcept { return context_.connection.trust(); }
+    bool isAccepted() const noexcept { return trust() != nullptr && trust()->accepted(); }
+    bool agreedOnHTTP2() const noexcept { return trust() != nullptr && trust()->agreedOnHTTP2(); }
+    std::size_t bytesArrived() const noexcept { return trust() != nullptr ? trust()->bytesArrived() : 0; }
+
     template <class T>
     void set(CURLoption option, T value) {
         if (setupResult_ == CURLE_OK) setupResult_ = curl_easy_setopt(easy_.get(), option, value);
@@ -104,6 +119,8 @@ class Exchange {
         set(CURLOPT_HTTPAUTH, 0L);
         set(CURLOPT_SUPPRESS_CONNECT_HEADERS, 1L);
         set(CURLOPT_NOSIGNAL, 1L);
+        set(CURLOPT_MAXAGE_CONN, static_cast<long>(context_.options.keepsIdleConnectionFor.count()));
+        set(CURLOPT_MAXLIFETIME_CONN, static_cast<long>(context_.options.keepsConnectionFor.count()));
         set(CURLOPT_QUICK_EXIT, 1L);  // a name server that is silent must not hold up the end of a task
         set(CURLOPT_ERRORBUFFER, errorText_.data());
     }
@@ -158,16 +175,15 @@ class Exchange {
     CURLcode drive() {
         while (true) {
             int running = 0;
-            if (curl_multi_perform(multi_.get(), &running) != CURLM_OK) return CURLE_FAILED_INIT;
+            if (curl_multi_perform(multi_, &running) != CURLM_OK) return CURLE_FAILED_INIT;
             if (running == 0) break;
             if (!mayGoOn()) return CURLE_ABORTED_BY_CALLBACK;
             curl_waitfd interrupt{context_.interrupt.descriptor(), CURL_WAIT_POLLIN, 0};
             const auto wait = static_cast<int>(context_.options.pollInterval.count());
-            if (curl_multi_poll(multi_.get(), &interrupt, 1, wait, nullptr) != CURLM_OK)
-                return CURLE_FAILED_INIT;
+            if (curl_multi_poll(multi_, &interrupt, 1, wait, nullptr) != CURLM_OK) return CURLE_FAILED_INIT;
         }
         int remaining = 0;
-        const CURLMsg* const message = curl_multi_info_read(multi_.get(), &remaining);
+        const CURLMsg* const message = curl_multi_info_read(multi_, &remaining);
         return message != nullptr && message->msg == CURLMSG_DONE ? message->data.result : CURLE_FAILED_INIT;
     }
 
@@ -176,7 +192,7 @@ class Exchange {
             fail(URLErrorCode::cancelled, "the session was ended");
             return false;
         }
-        if (serverTrust_.bytesArrived() - bytesUsed_ > context_.options.maximumSilentBytes) {
+        if (bytesArrived() - bytesUsed_ > context_.options.maximumSilentBytes) {
             fail(URLErrorCode::badServerResponse, "the server sends much that is no part of an answer");
             return false;
         }
@@ -189,7 +205,7 @@ class Exchange {
 
     Result<TransferAnswer> answer(CURLcode result) {
         if (!failure_ && head_.isComplete()) failWhereCut(result);
-        if (result == CURLE_OK && !failure_ && !(serverTrust_.accepted() && head_.isComplete()))
+        if (result == CURLE_OK && !failure_ && !(isAccepted() && head_.isComplete()))
             fail(URLErrorCode::badServerResponse, "the answer is not HTTP");
         if (allocationFailed_) fail(URLErrorCode::tooLarge, "the answer is larger than can be kept");
         if (result != CURLE_OK && !failure_) failFrom(result);
@@ -211,7 +227,7 @@ class Exchange {
     // Whoever can cut a connection could shorten a body whose end nothing else tells (RFC 9112, section 6.3),
     // and older releases of the library take any end for one. HTTP/2 has an end of its own.
     void failWhereCut(CURLcode result) {
-        const bool endSeen = serverTrust_.agreedOnHTTP2() || serverTrust_.sawOrderlyEnd();
+        const bool endSeen = agreedOnHTTP2() || (trust() != nullptr && trust()->sawOrderlyEnd());
         const bool cut = head_.hasOpenEnd(request_.method) && !endSeen;
         if (cut && (result == CURLE_OK || result == CURLE_RECV_ERROR))
             fail(URLErrorCode::connectionLost, "the connection was cut within the answer");
@@ -263,13 +279,17 @@ class Exchange {
 
     static CURLcode onTLSContext(CURL*, void* context, void* self) noexcept {
         auto& exchange = *static_cast<Exchange*>(self);
-        return exchange.serverTrust_.install(context) ? CURLE_OK : CURLE_SSL_CONNECT_ERROR;
+        exchange.bytesUsed_ = 0;
+        const bool isStrict = exchange.context_.connection.prepare(
+            context,
+            [&exchange](const std::vector<Data>& certificates) { return exchange.judge(certificates); });
+        return isStrict ? CURLE_OK : CURLE_SSL_CONNECT_ERROR;
     }
 
-    static int onConnected(void* self, char*, char*, int, int) noexcept {
+    static int onConnected(void* self, char*, char*, int, int localPort) noexcept {
         auto& exchange = *static_cast<Exchange*>(self);
         const bool judged = exchange.guarded([&] {
-            if (!exchange.serverTrust_.accepted())
+            if (!exchange.context_.connection.confirm(localPort))
                 exchange.fail(URLErrorCode::secureConnectionFailed, "the server was not judged");
             return !exchange.failure_;
         });
@@ -295,7 +315,7 @@ class Exchange {
     void checkHead() {
         // The library believes a status line that speaks of HTTP/2 whatever was agreed on, and reads a body
         // by other rules then.
-        if (head_.isHTTP1() == serverTrust_.agreedOnHTTP2())
+        if (head_.isHTTP1() == agreedOnHTTP2())
             fail(URLErrorCode::badServerResponse, "the answer is not of the HTTP version agreed on");
         // It takes the last of several lengths, the digits that a malformed one begins with, and unpacks a
         // transfer whose compression nobody asked for, however much that makes of it.
@@ -312,7 +332,7 @@ class Exchange {
 
     void noteProgress() {
         lastActivity_ = context_.options.now();
-        bytesUsed_ = serverTrust_.bytesArrived();
+        bytesUsed_ = bytesArrived();
     }
 
     static std::size_t onBody(char* bytes, std::size_t, std::size_t count, void* self) noexcept {
@@ -352,7 +372,7 @@ class Exchange {
     BodySink& sink_;
     Target target_;
     ResponseHead head_;
-    ServerTrust serverTrust_;
+    CURLM* const multi_;  // the slot's
     HeaderListHandle headers_;
     std::array<char, CURL_ERROR_SIZE> errorText_{};
     std::optional<Error> failure_;
@@ -360,10 +380,8 @@ class Exchange {
     CURLcode setupResult_ = CURLE_OK;
     Clock::time_point lastActivity_;
     std::size_t received_ = 0;  // of the body
-    std::size_t bytesUsed_ =
-        0;  // of those that arrived, when the last line or piece of the body came of them
+    std::size_t bytesUsed_;     // of those that arrived, when the last line or piece of the body came of them
     curl_off_t uploaded_ = 0;
-    MultiHandle multi_{curl_multi_init()};
     EasyHandle easy_{curl_easy_init()};  // last: it uses all of the above until it is gone
 };
 

@@ -1,7 +1,8 @@
 // One HTTPS exchange: a request, and the answer of that very URL. Redirects are the caller's to follow.
 //
-// Every exchange has a connection of its own, so that every exchange is judged. Nothing is taken from the
-// environment but the proxy (https_proxy, all_proxy, no_proxy); no cookies, no credentials, no cache.
+// A server is judged once a connection, in the handshake: every exchange, unless the session keeps its
+// connection for the next one. Nothing is taken from the environment but the proxy (https_proxy, all_proxy,
+// no_proxy); no cookies, no credentials, no cache.
 #pragma once
 
 #include <functional>
@@ -10,6 +11,7 @@
 #include <vector>
 
 #include "https/body_sink.h"
+#include "https/connection_slot.h"
 #include "https/interrupt.h"
 #include "https/session_options.h"
 
@@ -17,6 +19,7 @@ namespace pinwell::https {
 
 struct TransferContext {
     const SessionOptions& options;
+    ConnectionSlot& connection;  // the calling thread's
     const Interrupt& interrupt;  // ends the exchange with `cancelled`
     std::size_t maximumBody;
 
