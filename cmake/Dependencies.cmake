@@ -11,14 +11,18 @@ find_package(ZLIB REQUIRED)
 pkg_check_modules(RE2 REQUIRED IMPORTED_TARGET re2)
 pkg_check_modules(SECCOMP REQUIRED IMPORTED_TARGET libseccomp>=2.5)
 
-# The companions alone.
-find_path(TOMLPLUSPLUS_INCLUDE_DIR toml++/toml.h REQUIRED)  # a header
-
-# The local record service alone.
-find_package(SQLiteCpp REQUIRED)
-find_package(SQLite3 REQUIRED)
-find_package(CLI11 REQUIRED)
-find_package(Boost 1.74 REQUIRED CONFIG)
+# Single companions alone.
+if(PINWELL_GATE)
+  find_path(TOMLPLUSPLUS_INCLUDE_DIR toml++/toml.h REQUIRED)  # a header
+endif()
+if(PINWELL_INSPECT OR PINWELL_GATE OR PINWELL_LUMORA)
+  find_package(CLI11 REQUIRED)
+endif()
+if(PINWELL_LUMORA)
+  find_package(SQLiteCpp REQUIRED)
+  find_package(SQLite3 REQUIRED)
+  find_package(Boost 1.74 REQUIRED CONFIG)
+endif()
 
 if(PINWELL_BUILD_TESTS)
   find_package(GTest REQUIRED)
