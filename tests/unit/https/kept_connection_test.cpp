@@ -63,11 +63,14 @@ TEST_F(KeptConnection, EndsWithAServerThatClosesIt) {
 
 // The end may come before the next request, or be found by it.
 TEST_F(KeptConnection, EndsWithAServerThatClosesItWithoutSayingSoBefore) {
-    for (const auto& end : {Script().respond(staying("one")).close(), Script().respond(staying("one")).cut(),
-                            Script().respond(staying("one")).reset()}) {
-        server.enqueue(end);
+    for (Script& (Script::*const end)() : {&Script::close, &Script::cut, &Script::reset}) {
+        const Gate isOver;
+        Script first;
+        (first.respond(staying("one")).waitFor(isOver).*end)();
+        server.enqueue(first);
         server.enqueue(Script().respond({.body = "two"}));
         EXPECT_EQ(fetch(server.url()).text(), "one");
+        isOver.open();
         EXPECT_EQ(fetch(post(server.url(), "body")).text(), "two");
     }
 }
