@@ -7,6 +7,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstdlib>
+#include <filesystem>
 #include <utility>
 
 #include "foundation/format.h"
@@ -41,6 +42,20 @@ std::string prologue(std::string_view counts) {
     return text + ">\n";
 }
 
+// What is to be replaced must be a file: a device's name would be a file's from then on. A link stays one.
+Result<std::string> placeOfReport(const std::string& path) {
+    struct stat status {};
+    if (::stat(path.c_str(), &status) != 0) {
+        const bool isLink = ::lstat(path.c_str(), &status) == 0;
+        return isLink ? Result<std::string>(Error::posix(ENOENT, path)) : path;
+    }
+    if (!S_ISREG(status.st_mode)) return Error::posix(EINVAL, path);
+    std::error_code failure;
+    const std::string place = std::filesystem::canonical(path, failure);
+    if (failure) return Error::posix(failure.value(), path);
+    return place;
+}
+
 }  // namespace
 
 std::string escapedForXml(const std::string& text) {
@@ -66,7 +81,10 @@ std::string escapedForXml(const std::string& text) {
     return escaped;
 }
 
-Result<JUnitReport> JUnitReport::begin(const std::string& path) {
+Result<JUnitReport> JUnitReport::begin(const std::string& name) {
+    const auto place = placeOfReport(name);
+    if (!place) return place.error();
+    const std::string& path = *place;
     std::string temporary = path + ".XXXXXX";
     foundation::FileDescriptor file(::mkostemp(temporary.data(), O_CLOEXEC));
     if (!file) return Error::posix(errno, path);

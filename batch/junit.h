@@ -14,10 +14,14 @@ namespace pinwell::batch {
 /// end. A report that is not finished is removed.
 class JUnitReport {
   public:
-    static foundation::Result<JUnitReport> begin(const std::string& path);
+    /// An error names what is there and no file, or cannot be written.
+    static foundation::Result<JUnitReport> begin(const std::string& name);
     JUnitReport(JUnitReport&& other) noexcept;
     JUnitReport& operator=(JUnitReport&&) = delete;
     ~JUnitReport();
+
+    /// Where it will be: no link, but what the link led to.
+    const std::string& path() const noexcept { return path_; }
 
     void add(const Report& report);
 

@@ -76,6 +76,7 @@ class Run {
         return finish();
     }
 
+    /// All artefacts worked, whatever became of the files that say so.
     bool wentWell() const { return summary_.exitStatus == EX_OK; }
 
   private:
@@ -155,7 +156,8 @@ class Run {
 };
 
 // Before there is a second thread. Where the paths of a list lead is not known yet.
-void giveUpRights(const Settings& settings, const Platform& platform, const std::string& temporary) {
+void giveUpRights(const Settings& settings, const Platform& platform, const std::string& temporary,
+                  const std::optional<JUnitReport>& junit) {
     using sandbox::Access;
     keepSecurityLibrary();
     sandbox::Confinement rights = confinementOfRuns(settings.operation, settings.paths, platform.directory);
@@ -167,7 +169,7 @@ void giveUpRights(const Settings& settings, const Platform& platform, const std:
             {URL::fileURLWithPath(path).deletingLastPathComponent().path(), Access::write});
     };
     writeBeside(temporary);
-    if (settings.junit) writeBeside(*settings.junit);
+    if (junit) writeBeside(junit->path());
     for (const std::string& missing : sandbox::confine(rights))
         if (settings.isVerbose) complain(missing);
 }
@@ -205,10 +207,10 @@ int runBatch(const Settings& settings, const foundation::FileDescriptor& signals
         return EX_CANTCREAT;
     }
     const HostPlatform host([](int) {}, HostPlatform::Connections::kept);
-    giveUpRights(settings, host.services(), temporary->path());
+    giveUpRights(settings, host.services(), temporary->path(), junit);
     Run run(settings, std::move(journal), std::move(junit));
     const int status = run.work(host.services(), *paths, signals);
-    if (status == EX_OK && !settings.keepsTemporaryFiles)
+    if (run.wentWell() && !settings.keepsTemporaryFiles)
         temporary->remove();
     else if (temporary->holdsFiles() && !settings.isQuiet)
         complain("tickets and copies are kept in " + temporary->path());

@@ -1,5 +1,11 @@
 #include "batch/progress.h"
 
+#include <sys/ioctl.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <string>
+
 #include "foundation/format.h"
 
 namespace pinwell::batch {
@@ -7,6 +13,14 @@ namespace {
 
 constexpr std::chrono::milliseconds kInterval{100};
 constexpr const char* kEraseLine = "\r\x1b[K";
+constexpr std::size_t kUsualColumns = 80;
+
+// Of the terminal, which may change any time.
+std::size_t columns() {
+    winsize size{};
+    if (::ioctl(STDERR_FILENO, TIOCGWINSZ, &size) != 0 || size.ws_col == 0) return kUsualColumns;
+    return size.ws_col;
+}
 
 }  // namespace
 
@@ -16,8 +30,10 @@ void Progress::show(std::uint64_t done, std::uint64_t failed, std::size_t inWork
     if (now - last_ < kInterval) return;
     last_ = now;
     isOnScreen_ = true;
-    errors_.write(kEraseLine +
-                  foundation::format("%llu done, %llu of them failed, %zu in work", done, failed, inWork));
+    std::string line =
+        foundation::format("%llu done, %llu of them failed, %zu in work", done, failed, inWork);
+    line.resize(std::min(line.size(), columns() - 1));  // a second line would stay
+    errors_.write(kEraseLine + line);
 }
 
 void Progress::clear() {

@@ -20,8 +20,9 @@ foundation::Result<PathList> PathList::open(std::vector<std::string> paths,
     foundation::FileDescriptor file;
     if (from) {
         // Standard input is duplicated: what is owned here is closed in the end.
+        // A pipe that nobody writes yet is not waited for here, where no signal would end it.
         const int number = *from == "-" ? ::fcntl(STDIN_FILENO, F_DUPFD_CLOEXEC, 3)
-                                        : ::open(from->c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY);
+                                        : ::open(from->c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY | O_NONBLOCK);
         if (number < 0) return foundation::Error::posix(errno, *from);
         file = foundation::FileDescriptor(number);
     }

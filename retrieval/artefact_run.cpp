@@ -116,6 +116,10 @@ Cause causeWithoutLookup(int status, PWHashedFile& file) {
 
 }  // namespace
 
+bool isPath(const std::string& text) noexcept {
+    return text.find('\0') == std::string::npos;
+}
+
 struct ArtefactRun::Reading {
     explicit Reading(const Platform& services) : platform(withSessions(services, sessions)) {}
 
@@ -161,23 +165,38 @@ void ArtefactRun::release() {
 
 std::optional<Outcome> ArtefactRun::begin() {
     const MessageRedirection redirection([this](std::string line) { messages_.push_back(std::move(line)); });
-    return read();
+    return guarded({kExitNoInput, Cause::notReadable}, [this] { return read(); });
+}
+
+// Among many artefacts, one that nobody has thought of must not end the others.
+std::optional<Outcome> ArtefactRun::guarded(Outcome ifThrown,
+                                            const std::function<std::optional<Outcome>()>& work) {
+    try {
+        return work();
+    } catch (const std::exception& failure) {
+        messages_.push_back(foundation::format("%@ could not be worked on: %@", path_, failure.what()));
+        return ifThrown;
+    }
 }
 
 // Reads what the artefact is and its hash; nothing is judged yet.
-std::optional<Outcome> ArtefactRun::open() {
+std::optional<Outcome> ArtefactRun::open(const PWHashedFile::BeforeReading& beforeReading) {
     messages_.clear();
     recordName_.clear();
     kind_ = Kind::none;
+    if (!isPath(path_)) {
+        messages_.push_back(foundation::format("%@ is no path: it holds a zero byte.", path_));
+        return Outcome{kExitNoInput, Cause::notReadable};
+    }
     reading_ = std::make_unique<Reading>(platform_);
     Reading& reading = *reading_;
     const URL url = URL::fileURLWithPath(path_);
 
-    reading.file = PWHashedFile::initWithFileURL(url, reading.platform);
+    reading.file = PWHashedFile::initWithFileURL(url, reading.platform, beforeReading);
     if (reading.file == nullptr) return Outcome{kExitNoInput, Cause::unsupported};
     kind_ = kindOf(*reading.file);
     if (const int status = reading.file->appropriateExitCode(); status != kExitOK)
-        return Outcome{status, Cause::notReadable};
+        return Outcome{status, status == kExitCannotCreate ? Cause::notWritable : Cause::notReadable};
     if (kind_ == Kind::bundle) {
         reading.executable = platform_.files.mainExecutableOfBundle(url);
         if (reading.executable)
@@ -206,6 +225,10 @@ std::optional<Outcome> ArtefactRun::read() {
 
 std::optional<Outcome> ArtefactRun::end(const Answer& answer) {
     const MessageRedirection redirection([this](std::string line) { messages_.push_back(std::move(line)); });
+    return guarded({kExitCannotCreate, Cause::notWritable}, [&] { return write(answer); });
+}
+
+std::optional<Outcome> ArtefactRun::write(const Answer& answer) {
     std::unique_ptr<files::ItemLock> lock;
     if (operation_ == kOperationStaple && !lockArtefact(platform_, URL::fileURLWithPath(path_), lock))
         return Outcome{kExitCannotCreate, Cause::notWritable};
@@ -220,10 +243,14 @@ std::optional<Outcome> ArtefactRun::end(const Answer& answer) {
 Outcome ArtefactRun::attach(
     const std::function<foundation::Result<foundation::Data>(const std::string& recordName)>& ticketFor) {
     const MessageRedirection redirection([this](std::string line) { messages_.push_back(std::move(line)); });
+    return *guarded({kExitCannotCreate, Cause::notWritable}, [&] { return attachUnderLock(ticketFor); });
+}
+
+Outcome ArtefactRun::attachUnderLock(
+    const std::function<foundation::Result<foundation::Data>(const std::string& recordName)>& ticketFor) {
     std::unique_ptr<files::ItemLock> lock;
-    if (!lockArtefact(platform_, URL::fileURLWithPath(path_), lock))
-        return {kExitCannotCreate, Cause::notWritable};
-    if (const auto ended = open()) return *ended;
+    if (const auto ended = open([&] { return lockArtefact(platform_, URL::fileURLWithPath(path_), lock); }))
+        return *ended;
     if (recordName_.empty()) return {kExitNoInput, Cause::notSigned};
     const auto ticket = ticketFor(recordName_);
     if (!ticket) {

@@ -5,8 +5,9 @@
 //   if (!outcome) outcome = run.end(answerFor(run.recordName()));
 //
 // The controller judges, writes, reads back and says what it says in `pinwell`; here it neither prints nor
-// ends the process. A staple holds the artefact's lock from before the write until after the read-back, and
-// not while the lookup is under way: many runs wait for one answer.
+// ends the process. An exception ends the run of this artefact, and no other one. A staple holds the
+// artefact's lock from before the write until after the read-back, and not while the lookup is under way:
+// many runs wait for one answer.
 #pragma once
 
 #include <cstdint>
@@ -38,6 +39,9 @@ enum class Kind : std::uint8_t { none, bundle, diskImage, package };
 std::string_view nameOf(Kind kind) noexcept;
 
 Kind kindOf(const PWHashedFile& file);
+
+/// False if the text holds a zero byte: a call of the system would take what comes before it for the path.
+bool isPath(const std::string& text) noexcept;
 
 /// For one thread at a time, which may be another one for each half.
 class ArtefactRun {
@@ -75,9 +79,13 @@ class ArtefactRun {
 
   private:
     struct Reading;
-    std::optional<Outcome> open();
+    std::optional<Outcome> open(const PWHashedFile::BeforeReading& beforeReading = {});
     std::optional<Outcome> read();
+    std::optional<Outcome> write(const Answer& answer);
     std::optional<Outcome> finish(const Answer& answer);
+    std::optional<Outcome> guarded(Outcome ifThrown, const std::function<std::optional<Outcome>()>& work);
+    Outcome attachUnderLock(
+        const std::function<foundation::Result<foundation::Data>(const std::string& recordName)>& ticketFor);
     bool isAsRead() const;
 
     const std::string path_;

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "foundation/format.h"
 #include "src/messages.h"
 #include "src/ticket_record.h"
 
@@ -9,20 +10,28 @@ namespace pinwell::ticket_files {
 
 using retrieval::Cause;
 
-OpenedArtefact openArtefact(const std::string& path, std::string_view operation, const Platform& platform) {
+OpenedArtefact openArtefact(const std::string& path, std::string_view operation, const Platform& platform,
+                            const PWHashedFile::BeforeReading& beforeReading) {
     OpenedArtefact opened;
     opened.report.path = path;
     opened.report.operation = operation;
     opened.report.attempts = 1;
     const MessageRedirection redirection(
         [&](std::string line) { opened.report.messages.push_back(std::move(line)); });
-    const auto file = PWHashedFile::initWithFileURL(URL::fileURLWithPath(path), platform);
     opened.report.exitStatus = kExitNoInput;
+    opened.report.cause = Cause::notReadable;
+    if (!retrieval::isPath(path)) {
+        opened.report.messages.push_back(foundation::format("%@ is no path: it holds a zero byte.", path));
+        return opened;
+    }
+    const auto file = PWHashedFile::initWithFileURL(URL::fileURLWithPath(path), platform, beforeReading);
     opened.report.cause = Cause::unsupported;
     if (file == nullptr) return opened;
     opened.report.kind = retrieval::kindOf(*file);
-    opened.report.cause = Cause::notReadable;
-    if (file->appropriateExitCode() != kExitOK) return opened;
+    opened.report.exitStatus = file->appropriateExitCode();
+    opened.report.cause =
+        opened.report.exitStatus == kExitCannotCreate ? Cause::notWritable : Cause::notReadable;
+    if (opened.report.exitStatus != kExitOK) return opened;
     opened.report.exitStatus = kExitOK;
     opened.report.cause = Cause::worked;
     opened.file = file;

@@ -20,8 +20,10 @@ struct OpenedArtefact {
     foundation::Data hash;  // empty if it has none
 };
 
-/// `operation` is the command's name.
-OpenedArtefact openArtefact(const std::string& path, std::string_view operation, const Platform& platform);
+/// `operation` is the command's name. `beforeReading`, if given, is called when the kind is known and nothing
+/// has been read; false ends it as notWritable.
+OpenedArtefact openArtefact(const std::string& path, std::string_view operation, const Platform& platform,
+                            const PWHashedFile::BeforeReading& beforeReading = {});
 
 /// "2-2-0a1b....ticket": the file that a record's ticket is kept in.
 std::string fileNameOfRecord(const std::string& recordName);

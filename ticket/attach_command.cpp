@@ -1,5 +1,3 @@
-#include "companion/own_temporary_directory.h"
-#include "foundation/format.h"
 #include "src/DownloadDelegate.h"
 #include "ticket/artefact.h"
 #include "ticket/commands.h"
@@ -8,14 +6,6 @@ namespace pinwell::ticket_files {
 
 int attach(const Settings& settings, const Platform& platform) {
     Reporter reporter(settings);
-    // The tool's own road leaves a ticket and a copy there; those that came from a file are of no further
-    // use.
-    auto temporary = companion::OwnTemporaryDirectory::make(kProgramName);
-    if (!temporary) {
-        reporter.complain("no temporary directory can be made: " + temporary.error().localizedDescription(),
-                          kExitCannotCreate);
-        return reporter.exitStatus();
-    }
     if (settings.ticket) {
         const auto readable = platform.files.contentsOfFile(URL::fileURLWithPath(*settings.ticket));
         if (!readable) {
@@ -30,9 +20,7 @@ int attach(const Settings& settings, const Platform& platform) {
                                                .appendingPathComponent(fileNameOfRecord(recordName));
         return platform.files.contentsOfFile(file);
     };
-    bool wroteAll = true;
-    for (const std::string& path : settings.arguments) {
-        const auto begun = retrieval::Clock::now();
+    return writeEach(settings, reporter, [&](const std::string& path) {
         retrieval::ArtefactRun run(path, kOperationStaple, platform);
         const retrieval::Outcome outcome = run.attach(ticketFor);
         retrieval::Report report;
@@ -42,18 +30,9 @@ int attach(const Settings& settings, const Platform& platform) {
         report.recordName = run.recordName();
         report.exitStatus = outcome.exitStatus;
         report.cause = outcome.cause;
-        report.attempts = 1;
-        report.seconds = std::chrono::duration<double>(retrieval::Clock::now() - begun).count();
         report.messages = run.messages();
-        wroteAll = wroteAll && report.exitStatus != kExitCannotCreate;
-        reporter.report(report);
-    }
-    // With them a write that was cut short can be put right.
-    if (wroteAll || !temporary->holdsFiles())
-        temporary->remove();
-    else if (!settings.isQuiet)
-        reporter.complain("tickets and copies are kept in " + temporary->path(), kExitOK);
-    return reporter.exitStatus();
+        return report;
+    });
 }
 
 }  // namespace pinwell::ticket_files

@@ -1,6 +1,9 @@
 // The commands of pinwell-ticket. Each prints what came of its arguments and returns the exit status.
 #pragma once
 
+#include <functional>
+#include <string>
+
 #include "companion/output.h"
 #include "retrieval/report.h"
 #include "src/platform.h"
@@ -33,6 +36,12 @@ class Reporter {
     const bool inColor_;
     int worst_ = 0;
 };
+
+/// Does `write` for each path and reports what came of it, with a temporary directory of the command's own.
+/// It stays, and is named, if an artefact could not be written: with the copies in it, one that was cut short
+/// can be put right.
+int writeEach(const Settings& settings, Reporter& reporter,
+              const std::function<retrieval::Report(const std::string& path)>& write);
 
 /// Prints the record name of each artefact. No network.
 int hash(const Settings& settings, const Platform& platform);

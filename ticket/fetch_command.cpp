@@ -47,11 +47,10 @@ class Fetching {
         if (settings_.deadline)
             options.deadline = retrieval::Clock::now() +
                                std::chrono::duration_cast<retrieval::Clock::duration>(*settings_.deadline);
-        std::atomic<int> signal = 0;
         {
             retrieval::Cancellation cancellation;
             const companion::SignalWatch watch(std::move(signals_), [&](int number) {
-                signal = number;
+                signal_ = number;
                 cancellation.cancel();
             });
             retrieval::fetchTickets(names_, options, platform_, cancellation,
@@ -62,7 +61,8 @@ class Fetching {
         if (const auto written = index_.write(*settings_.output); !written)
             reporter_.complain("the index cannot be written: " + written.error().localizedDescription(),
                                kExitCannotCreate);
-        return signal != 0 ? companion::kSignalBase + signal : reporter_.exitStatus();
+        const int status = reporter_.exitStatus();
+        return signal_ != 0 ? companion::kSignalBase + signal_ : status;
     }
 
   private:
@@ -141,6 +141,7 @@ class Fetching {
         Report& report = reports_[number];
         report.exitStatus = ticket.exitStatus;
         report.cause = ticket.cause;
+        if (ticket.cause == Cause::interrupted) report.exitStatus = companion::kSignalBase + signal_;
         report.attempts = ticket.attempts;
         report.seconds = ticket.seconds;
         report.messages = std::move(ticket.messages);
@@ -171,6 +172,7 @@ class Fetching {
     Reporter reporter_;
     Index index_;
     foundation::FileDescriptor signals_;
+    std::atomic<int> signal_ = 0;  // the one that has come
     std::set<std::string> known_;
     std::vector<std::string> names_;
     std::vector<Report> reports_;  // one a name

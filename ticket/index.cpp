@@ -25,6 +25,11 @@ std::string textOf(const Value& value) {
     return *value.string();
 }
 
+bool truthOf(const Value& value) {
+    if (value.boolean() == nullptr) throw foundation::ValueTypeError("true or false was expected");
+    return *value.boolean();
+}
+
 }  // namespace
 
 Result<Index> Index::read(const std::string& directory) {
@@ -43,7 +48,7 @@ Result<Index> Index::read(const std::string& directory) {
             return notAnIndex(path);
         for (const Value& one : *tickets)
             index.set(textOf(one["recordName"]), {textOf(one["file"]), textOf(one["sha256"]),
-                                                  textOf(one["fetched"]), one["revoked"].boolValue()});
+                                                  textOf(one["fetched"]), truthOf(one["revoked"])});
     } catch (const foundation::ValueTypeError&) {
         return notAnIndex(path);
     }

@@ -184,7 +184,7 @@ int run(int argc, char** argv) {
 
     // Lines are collected an artefact: what is not collected is not printed.
     verboseLevel = settings.isVerbose ? kVerbosityVerbose : kVerbosityQuiet;
-    const HostPlatform host([](int) {});
+    const HostPlatform host([](int) {}, HostPlatform::Connections::kept);
     giveUpRights(command, settings, host.services());
     if (command == "hash") return hash(settings, host.services());
     if (command == "fetch") return fetch(settings, host.services());

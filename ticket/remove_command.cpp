@@ -1,4 +1,3 @@
-#include "companion/own_temporary_directory.h"
 #include "foundation/format.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/messages.h"
@@ -18,22 +17,13 @@ bool deleteTicket(PWHashedFile& file, std::optional<Error>& error) {
 }
 
 retrieval::Report removeTicket(const std::string& path, const Platform& platform) {
-    std::vector<std::string> messages;
-    const MessageRedirection redirection([&](std::string line) { messages.push_back(std::move(line)); });
     std::unique_ptr<files::ItemLock> lock;
-    if (!lockArtefact(platform, URL::fileURLWithPath(path), lock)) {
-        retrieval::Report report;
-        report.path = path;
-        report.operation = "remove";
-        report.exitStatus = kExitCannotCreate;
-        report.cause = Cause::notWritable;
-        report.attempts = 1;
-        report.messages = std::move(messages);
-        return report;
-    }
-    OpenedArtefact artefact = openArtefact(path, "remove", platform);
+    OpenedArtefact artefact = openArtefact(
+        path, "remove", platform, [&] { return lockArtefact(platform, URL::fileURLWithPath(path), lock); });
     retrieval::Report& report = artefact.report;
     if (artefact.file == nullptr) return report;
+    std::vector<std::string> messages;
+    const MessageRedirection redirection([&](std::string line) { messages.push_back(std::move(line)); });
     const std::string name = artefact.file->fileURL()->lastPathComponent();
     const auto end = [&](int status, Cause cause, std::string message) {
         report.messages.insert(report.messages.end(), messages.begin(), messages.end());
@@ -69,26 +59,8 @@ retrieval::Report removeTicket(const std::string& path, const Platform& platform
 
 int remove(const Settings& settings, const Platform& platform) {
     Reporter reporter(settings);
-    auto temporary = companion::OwnTemporaryDirectory::make(kProgramName);
-    if (!temporary) {
-        reporter.complain("no temporary directory can be made: " + temporary.error().localizedDescription(),
-                          kExitCannotCreate);
-        return reporter.exitStatus();
-    }
-    bool wroteAll = true;
-    for (const std::string& path : settings.arguments) {
-        const auto begun = retrieval::Clock::now();
-        retrieval::Report report = removeTicket(path, platform);
-        report.seconds = std::chrono::duration<double>(retrieval::Clock::now() - begun).count();
-        wroteAll = wroteAll && report.exitStatus != kExitCannotCreate;
-        reporter.report(report);
-    }
-    // With them a write that was cut short can be put right.
-    if (wroteAll || !temporary->holdsFiles())
-        temporary->remove();
-    else if (!settings.isQuiet)
-        reporter.complain("copies are kept in " + temporary->path(), kExitOK);
-    return reporter.exitStatus();
+    return writeEach(settings, reporter,
+                     [&](const std::string& path) { return removeTicket(path, platform); });
 }
 
 }  // namespace pinwell::ticket_files

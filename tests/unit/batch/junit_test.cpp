@@ -1,0 +1,108 @@
+// JUnit reports, and files that they must not take the place of.
+#include "batch/junit.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+
+#include <filesystem>
+
+#include "support/temporary_directory.h"
+
+namespace pinwell::test {
+namespace {
+
+using batch::JUnitReport;
+using batch::Report;
+using batch::Summary;
+using retrieval::Cause;
+using testing::AllOf;
+using testing::HasSubstr;
+using testing::Not;
+
+class JUnit : public testing::Test {
+  protected:
+    std::string written(const std::vector<Report>& reports) const {
+        auto junit = JUnitReport::begin(file);
+        EXPECT_TRUE(junit);
+        Summary summary;
+        summary.operation = "staple";
+        for (const Report& report : reports) {
+            summary.count(report);
+            junit->add(report);
+        }
+        EXPECT_TRUE(junit->finish(summary));
+        return readFile(file);
+    }
+    static Report reportOf(Cause cause, const std::string& path = "a.dmg",
+                           const std::string& message = "why") {
+        return {.path = path,
+                .operation = "staple",
+                .kind = {},
+                .recordName = {},
+                .exitStatus = cause == Cause::worked ? 0 : 65,
+                .cause = cause,
+                .attempts = 1,
+                .seconds = 1.2345,
+                .messages = {message},
+                .file = std::nullopt};
+    }
+    std::size_t filesThere() const {
+        return static_cast<std::size_t>(
+            std::distance(std::filesystem::directory_iterator(directory.path()), {}));
+    }
+    TemporaryDirectory directory;
+    const std::string file = directory / "report.xml";
+};
+
+TEST_F(JUnit, TellsFailuresFromErrors) {
+    const std::string text = written({reportOf(Cause::worked), reportOf(Cause::notIssued),
+                                      reportOf(Cause::unreachable), reportOf(Cause::timedOut)});
+    EXPECT_THAT(text, AllOf(HasSubstr(R"(tests="4" failures="1" errors="2" skipped="0")"),
+                            HasSubstr(R"(<failure type="notIssued")"),
+                            HasSubstr(R"(<error type="unreachable")"), HasSubstr(R"(time="1.235")")));
+}
+
+TEST_F(JUnit, EscapesWhatXmlHasAMeaningFor) {
+    const std::string text = written({reportOf(Cause::notIssued, "a<b>&\"c\n\x01\xff.dmg", "]]></failure>")});
+    EXPECT_THAT(text, AllOf(HasSubstr("a&lt;b&gt;&amp;&quot;c"), HasSubstr("]]&gt;&lt;/failure&gt;"),
+                            Not(HasSubstr("\x01")), Not(HasSubstr("\xff"))));
+}
+
+TEST_F(JUnit, IsThereAsAWholeOrNotAtAll) {
+    writeFile(file, "the last one");
+    {
+        auto junit = JUnitReport::begin(file);
+        ASSERT_TRUE(junit);
+        junit->add(reportOf(Cause::worked));
+        EXPECT_EQ(readFile(file), "the last one");
+    }
+    EXPECT_EQ(readFile(file), "the last one");
+    EXPECT_EQ(filesThere(), 1U);
+    EXPECT_THAT(written({}), HasSubstr("tests=\"0\""));
+    EXPECT_EQ(filesThere(), 1U);
+}
+
+TEST_F(JUnit, TakesThePlaceOfNoDeviceAndNoFolder) {
+    ASSERT_EQ(::mkfifo((directory / "pipe").c_str(), 0600), 0);
+    std::filesystem::create_symlink("nowhere", directory / "link");
+    std::filesystem::create_symlink("/dev/null", directory / "device");
+    for (const std::string& path :
+         {directory / "pipe", directory / "link", directory / "device", directory.path(),
+          std::string("/dev/null"), std::string("/dev/stdout"), directory / "no/such"})
+        EXPECT_FALSE(JUnitReport::begin(path)) << path;
+    EXPECT_TRUE(std::filesystem::is_fifo(directory / "pipe"));
+    EXPECT_TRUE(std::filesystem::is_symlink(directory / "device"));
+    EXPECT_EQ(filesThere(), 3U);
+}
+
+TEST_F(JUnit, FollowsALinkToAFile) {
+    writeFile(directory / "real.xml", "old");
+    std::filesystem::create_symlink("real.xml", file);
+    EXPECT_THAT(written({}), HasSubstr("testsuite"));
+    EXPECT_TRUE(std::filesystem::is_symlink(file));
+    EXPECT_THAT(readFile(directory / "real.xml"), HasSubstr("testsuite"));
+}
+
+}  // namespace
+}  // namespace pinwell::test

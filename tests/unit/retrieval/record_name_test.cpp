@@ -1,0 +1,78 @@
+// The hash in the name of a record, and the causes.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <set>
+
+#include "retrieval/cause.h"
+#include "retrieval/ticket_fetch.h"
+
+namespace pinwell::test {
+namespace {
+
+using retrieval::Cause;
+using retrieval::hashInRecordName;
+
+const std::string kTwenty(40, 'a');
+
+TEST(RecordName, HoldsAHash) {
+    EXPECT_EQ(hashInRecordName("2/2/" + kTwenty), foundation::Data(20, std::byte{0xAA}));
+    EXPECT_EQ(hashInRecordName("1/" + kTwenty), foundation::Data(20, std::byte{0xAA}));
+    EXPECT_EQ(hashInRecordName("2/4/" + std::string(96, '0')), foundation::Data(48));
+    EXPECT_TRUE(hashInRecordName("2/4294967295/" + kTwenty));
+    EXPECT_TRUE(hashInRecordName("2/1/" + std::string(128, '9')));
+}
+
+TEST(RecordName, ReturnsNulloptForWhatIsNone) {
+    for (const std::string& name : {std::string(),
+                                    std::string("2"),
+                                    std::string("2/"),
+                                    std::string("2/2"),
+                                    std::string("2/2/"),
+                                    "2//" + kTwenty,
+                                    "2/02/" + kTwenty,
+                                    "2/0/" + kTwenty,
+                                    "2/-2/" + kTwenty,
+                                    "2/x/" + kTwenty,
+                                    "2/12345678901/" + kTwenty,
+                                    "3/2/" + kTwenty,
+                                    "/2/2/" + kTwenty,
+                                    "2/2/" + kTwenty + "/",
+                                    "2/2/" + kTwenty + "a",
+                                    "2/2/" + std::string(38, 'a'),
+                                    "2/2/" + std::string(130, 'a'),
+                                    "2/2/" + std::string(40, 'A'),
+                                    "2/2/" + std::string(40, 'g'),
+                                    " 2/2/" + kTwenty,
+                                    "2/2/" + kTwenty + "\n",
+                                    std::string("release/Sample.dmg"),
+                                    "./2/2/" + kTwenty})
+        EXPECT_EQ(hashInRecordName(name), std::nullopt) << name;
+}
+
+TEST(Cause, HasANameOfItsOwn) {
+    std::set<std::string_view> names;
+    for (const Cause cause : retrieval::allCauses()) {
+        EXPECT_FALSE(nameOf(cause).empty());
+        names.insert(nameOf(cause));
+    }
+    EXPECT_EQ(names.size(), 14U);
+}
+
+TEST(Cause, OnlyOneCanBeCured) {
+    for (const Cause cause : retrieval::allCauses())
+        EXPECT_EQ(isCurable(cause), cause == Cause::unreachable) << nameOf(cause);
+}
+
+TEST(ExitStatus, TheWorstOfTwoCounts) {
+    const std::vector<int> fromWorst{77, 73, 65, 66, 68, 1, 0};
+    for (std::size_t i = 0; i < fromWorst.size(); ++i) {
+        for (std::size_t j = i; j < fromWorst.size(); ++j) {
+            EXPECT_EQ(retrieval::worseStatus(fromWorst[i], fromWorst[j]), fromWorst[i]);
+            EXPECT_EQ(retrieval::worseStatus(fromWorst[j], fromWorst[i]), fromWorst[i]);
+        }
+    }
+}
+
+}  // namespace
+}  // namespace pinwell::test
