@@ -118,14 +118,29 @@ Value BatchTest::summaryOf(const ProcessResult& result) {
     return document ? (*document)["summary"] : Value();
 }
 
+void BatchTest::expectValid(const ProcessResult& result, const std::string& schema) const {
+    std::vector<std::string> arguments;
+    for (const std::string& line : result.outputLines()) {
+        const std::string file = directory / ("lines/" + std::to_string(arguments.size()) + ".json");
+        writeFile(file, line);
+        arguments.insert(arguments.end(), {"-i", file});
+    }
+    arguments.push_back(schema);
+    const ProcessResult judged =
+        runProcess({.executable = JSONSCHEMA_PROGRAM,
+                    .arguments = arguments,
+                    .environment = {{"PATH", "/usr/bin:/bin"}, {"LC_ALL", "C.UTF-8"}}});
+    EXPECT_EQ(judged.exitStatus, 0) << judged.output << judged.errors << result.output;
+}
+
 bool BatchTest::isStapled(const Artefact& artefact, const Data& ticket) {
     return readFile(artefact.file()) == artefact.stapledWith(ticket);
 }
 
 std::size_t BatchTest::countStapled(const std::vector<Artefact>& artefacts) const {
-    return static_cast<std::size_t>(std::count_if(
-        artefacts.begin(), artefacts.end(),
-        [&](const Artefact& one) { return isStapled(one, records.at(recordNameOf(one)).value()); }));
+    return static_cast<std::size_t>(
+        std::count_if(artefacts.begin(), artefacts.end(),
+                      [&](const Artefact& one) { return isStapled(one, issuedFor(one)); }));
 }
 
 }  // namespace pinwell::test

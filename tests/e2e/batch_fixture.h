@@ -35,7 +35,10 @@ class BatchTest : public EndToEndTest {
     std::vector<Artefact> writeImages(std::size_t count, const std::string& folder = "builds/many");
     static std::vector<std::string> pathsOf(const std::vector<Artefact>& artefacts);
     static std::string recordNameOf(const Artefact& artefact) { return "2/" + artefact.prettyHash(); }
+    /// A new one, whose signature is its own.
     Data ticketOf(const Artefact& artefact) const { return sealed(artefact.payload()); }
+    /// The one in `records`.
+    const Data& issuedFor(const Artefact& artefact) const { return records.at(recordNameOf(artefact)).value(); }
 
     /// Answers lookups with what is in `records` then, in the order asked for.
     void serveRecords();
@@ -49,6 +52,9 @@ class BatchTest : public EndToEndTest {
     /// The lines of a run with --json, but for the summary.
     static std::vector<Value> reportsOf(const ProcessResult& result);
     static Value summaryOf(const ProcessResult& result);
+
+    /// Each line of the output keeps to the schema, by another program's word.
+    void expectValid(const ProcessResult& result, const std::string& schema) const;
 
     static bool isStapled(const Artefact& artefact, const Data& ticket);
     std::size_t countStapled(const std::vector<Artefact>& artefacts) const;

@@ -1,0 +1,430 @@
+// pinwell-batch when it is cut short, and when it goes on: journals, signals, two runs at once.
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <csignal>
+#include <filesystem>
+#include <set>
+
+#include "batch_fixture.h"
+#include "foundation/file_io.h"
+
+namespace pinwell::test {
+namespace {
+
+using testing::AllOf;
+using testing::Contains;
+using testing::Each;
+using testing::ElementsAre;
+using testing::EndsWith;
+using testing::HasSubstr;
+using testing::IsEmpty;
+using testing::SizeIs;
+using testing::StartsWith;
+
+class BatchResume : public BatchTest {
+  protected:
+    std::string journal = directory / "builds/staple.journal";
+
+    std::vector<std::string> resuming(const std::vector<Artefact>& artefacts,
+                                      const std::string& operation = "staple") const {
+        std::vector<std::string> arguments{operation, "--json", "--resume", journal};
+        for (const Artefact& one : artefacts) arguments.push_back(one.path);
+        return arguments;
+    }
+    ProcessResult resume(const std::vector<Artefact>& artefacts, const std::string& operation = "staple") {
+        return batch(resuming(artefacts, operation));
+    }
+    /// What lookups have asked for since the last call.
+    std::vector<std::string> askedFor() {
+        std::vector<std::string> names;
+        const auto requests = service().requests();
+        for (; seen_ < requests.size(); ++seen_)
+            for (std::string& name : namesIn(requests[seen_])) names.push_back(std::move(name));
+        return names;
+    }
+    static std::string wholeLinesOf(const std::string& output) {
+        return output.substr(0, output.rfind('\n') + 1);
+    }
+    std::uint64_t resumedOf(const ProcessResult& result) const {
+        return summaryOf(result)["resumed"].unsignedIntegerValue();
+    }
+    /// Bundles, whose ticket is a file of its own: it is there as a whole or not at all, whenever the process
+    /// dies.
+    std::vector<Artefact> writeBundles(std::size_t count) {
+        std::vector<Artefact> bundles;
+        for (std::size_t i = 0; i < count; ++i) {
+            Artefact one = signedBundle();
+            const Data codeDirectory = CodeDirectoryBuilder()
+                                           .covers(2, emptyRequirements())
+                                           .identifier("com.example.n" + std::to_string(i))
+                                           .build();
+            one.hash = codeHashOf(2, codeDirectory);
+            one.executable =
+                ExecutableImageBuilder().signature(SuperBlobBuilder::adHoc(codeDirectory).build()).build();
+            bundles.push_back(
+                writeArtefact(one, directory / ("builds/many/Bundle" + std::to_string(i) + ".app")));
+            records[recordNameOf(bundles.back())] = ticketOf(bundles.back());
+        }
+        return bundles;
+    }
+
+  private:
+    std::size_t seen_ = 0;
+};
+
+// What is done, and what is done again.
+
+TEST_F(BatchResume, WhatIsDoneIsNotDoneAgain) {
+    const auto images = writeImages(5);
+    serveRecords();
+    EXPECT_EQ(resume(images).exitStatus, 0);
+    EXPECT_THAT(askedFor(), SizeIs(5));
+    const ProcessResult again = resume(images);
+    EXPECT_EQ(again.exitStatus, 0);
+    EXPECT_THAT(reportsOf(again), IsEmpty());
+    EXPECT_EQ(resumedOf(again), 5U);
+    EXPECT_THAT(askedFor(), IsEmpty());
+}
+
+TEST_F(BatchResume, WhatIsDoneIsKnownByAnyNameOfItsPath) {
+    const auto images = writeImages(1);
+    std::filesystem::create_directory_symlink(directory / "builds/many", directory / "builds/link");
+    serveRecords();
+    EXPECT_EQ(resume(images).exitStatus, 0);
+    EXPECT_EQ(resumedOf(batch({"staple", "--json", "--resume", journal, "link/Image0.dmg"})), 1U);
+    EXPECT_EQ(resumedOf(batch({"staple", "--json", "--resume", journal, "./many/../many/Image0.dmg"})), 1U);
+}
+
+TEST_F(BatchResume, WhatWasRebuiltIsDoneAgain) {
+    auto images = writeImages(3);
+    serveRecords();
+    ASSERT_EQ(resume(images).exitStatus, 0);
+    askedFor();
+    images[1] = writeArtefact(unsignedImage(foundation::toData("built anew")), images[1].path);
+    records[recordNameOf(images[1])] = ticketOf(images[1]);
+    const ProcessResult again = resume(images);
+    EXPECT_EQ(again.exitStatus, 0);
+    EXPECT_EQ(resumedOf(again), 2U);
+    EXPECT_THAT(askedFor(), ElementsAre(recordNameOf(images[1])));
+    EXPECT_TRUE(isStapled(images[1], issuedFor(images[1])));
+}
+
+TEST_F(BatchResume, WhatWasRebuiltWithTheSameLengthAndTimeIsDoneAgain) {
+    auto images = writeImages(1);
+    serveRecords();
+    ASSERT_EQ(resume(images).exitStatus, 0);
+    const auto time = std::filesystem::last_write_time(images[0].path);
+    const auto length = std::filesystem::file_size(images[0].path);
+    const Artefact other = unsignedImage(foundation::toData("image builds/manyX"));
+    records[recordNameOf(other)] = ticketOf(other);
+    writeFile(images[0].path, other.stapledWith(issuedFor(other)));
+    ASSERT_EQ(std::filesystem::file_size(images[0].path), length);
+    std::filesystem::last_write_time(images[0].path, time);
+    askedFor();
+    EXPECT_EQ(resumedOf(resume(images)), 0U);
+    EXPECT_THAT(askedFor(), ElementsAre(recordNameOf(other)));
+}
+
+TEST_F(BatchResume, ABundleWhoseTicketIsGoneIsDoneAgain) {
+    const auto bundles = writeBundles(2);
+    serveRecords();
+    ASSERT_EQ(resume(bundles).exitStatus, 0);
+    std::filesystem::remove(bundles[0].file());
+    EXPECT_EQ(resumedOf(resume(bundles)), 1U);
+    EXPECT_EQ(countStapled(bundles), 2U);
+}
+
+TEST_F(BatchResume, WhatFailedIsDoneAgain) {
+    const auto images = writeImages(4);
+    auto ticket = std::exchange(records[recordNameOf(images[2])], std::nullopt);
+    serveRecords();
+    EXPECT_EQ(resume(images).exitStatus, 65);
+    askedFor();
+    records[recordNameOf(images[2])] = ticket;
+    EXPECT_EQ(resume(images).exitStatus, 0);
+    EXPECT_THAT(askedFor(), ElementsAre(recordNameOf(images[2])));
+    EXPECT_EQ(resumedOf(resume(images)), 4U);
+}
+
+TEST_F(BatchResume, WhatWasRevokedMeanwhileIsNotNoticed) {
+    // A journal says what was done, not what is so: that is for validate.
+    const auto images = writeImages(1);
+    serveRecords();
+    ASSERT_EQ(resume(images).exitStatus, 0);
+    records[recordNameOf(images[0])] = sealed(images[0].payload().revoked());
+    EXPECT_EQ(resume(images).exitStatus, 0);
+    EXPECT_EQ(batch({"validate", "-q"}, images).exitStatus, 77);
+}
+
+TEST_F(BatchResume, AStapleIsNoValidation) {
+    const auto images = writeImages(2);
+    serveRecords();
+    ASSERT_EQ(resume(images).exitStatus, 0);
+    const ProcessResult validated = resume(images, "validate");
+    EXPECT_THAT(reportsOf(validated), AllOf(SizeIs(2), Each(Reports("worked", 0))));
+    EXPECT_EQ(resumedOf(resume(images, "validate")), 2U);
+    EXPECT_EQ(resumedOf(resume(images)), 2U);
+}
+
+TEST_F(BatchResume, NamesOfAnyShapeAreKept) {
+    std::vector<Artefact> images;
+    for (const char* name :
+         {"with blank.dmg", "with\nnewline.dmg", "with%20.dmg", "with\xff\xfe.dmg", "\xc3\xa4.dmg"}) {
+        images.push_back(writeArtefact(unsignedImage(foundation::toData(name)),
+                                       directory / ("builds/many/" + std::string(name))));
+        records[recordNameOf(images.back())] = ticketOf(images.back());
+    }
+    serveRecords();
+    EXPECT_EQ(resume(images).exitStatus, 0);
+    EXPECT_EQ(resumedOf(resume(images)), images.size());
+    EXPECT_THAT(linesOf(readFile(journal)), SizeIs(1 + images.size()));
+}
+
+// Journals that are none, or damaged.
+
+TEST_F(BatchResume, WhatIsNoJournalIsRefusedAndLeftAlone) {
+    const auto images = writeImages(1);
+    serveRecords();
+    for (const std::string& contents : {std::string("a text\n"), std::string("pinwell-batch journal 2\n"),
+                                        std::string("pinwell-batch journal 10\n"), std::string(100'000, 'x'),
+                                        std::string("\0\0\0", 3), std::string("\n")}) {
+        writeFile(journal, contents);
+        const ProcessResult result = resume(images);
+        EXPECT_EQ(result.exitStatus, 73) << contents.substr(0, 40);
+        EXPECT_THAT(linesOf(result.errors),
+                    ElementsAre(StartsWith("pinwell-batch: the journal cannot be used: ")));
+        EXPECT_EQ(readFile(journal), contents);
+    }
+    EXPECT_THAT(service().requests(), IsEmpty());
+}
+
+TEST_F(BatchResume, AJournalMustBeARegularFile) {
+    const auto images = writeImages(1);
+    serveRecords();
+    std::filesystem::create_directory(directory / "builds/folder");
+    ASSERT_EQ(::mkfifo((directory / "builds/pipe").c_str(), 0600), 0);
+    for (const std::string& path : {directory / "builds/folder", directory / "builds/pipe",
+                                    std::string("/dev/full"), directory / "builds/missing/journal"}) {
+        journal = path;
+        EXPECT_EQ(resume(images).exitStatus, 73) << path;
+    }
+}
+
+TEST_F(BatchResume, LinesThatAreDamagedCountForNothing) {
+    const auto images = writeImages(3);
+    serveRecords();
+    ASSERT_EQ(resume(images).exitStatus, 0);
+    std::vector<std::string> lines = linesOf(readFile(journal));
+    ASSERT_THAT(lines, SizeIs(4));
+    lines[1] = "0 worked staple";
+    lines[2] += " and more";
+    const std::string garbage = std::string(70'000, 'g') + "\n\n \n\0\xff\n0 worked staple 1 1.1 - /\n";
+    writeFile(journal, lines[0] + "\n" + lines[1] + "\n" + lines[2] + "\n" + garbage + lines[3] + "\n");
+    EXPECT_EQ(resumedOf(resume(images)), 1U);
+    EXPECT_EQ(resumedOf(resume(images)), 3U);
+}
+
+TEST_F(BatchResume, ALineThatWasCutShortDoesNotSpoilTheNext) {
+    const auto images = writeImages(3);
+    serveRecords();
+    ASSERT_EQ(resume(images).exitStatus, 0);
+    const std::string whole = readFile(journal);
+    for (std::size_t length = whole.size(); length-- > 0;) {
+        if (length % 23 != 0) continue;  // a run of the program each
+        writeFile(journal, whole.substr(0, length));
+        EXPECT_EQ(resume(images).exitStatus, 0) << length;
+        EXPECT_EQ(resumedOf(resume(images)), 3U) << length;
+    }
+}
+
+TEST_F(BatchResume, AJournalThatCannotBeWrittenIsSaidOnce) {
+    const auto images = writeImages(60);
+    serveRecords();
+    ASSERT_EQ(batch({"staple", "-q"}, images).exitStatus, 0);
+    // No file may grow beyond 4 KiB. Tickets are smaller.
+    Command limited = batchCommand({});
+    limited.executable = "/bin/bash";
+    limited.arguments = {"-c", "ulimit -f 4; exec \"$0\" \"$@\"", PINWELL_BATCH_PROGRAM};
+    for (const std::string& argument : resuming(images, "validate")) limited.arguments.push_back(argument);
+    const ProcessResult result = runProcess(limited);
+    EXPECT_EQ(result.exitStatus, 74) << result.errors;
+    EXPECT_THAT(linesOf(result.errors), ElementsAre(HasSubstr(journal)));
+    EXPECT_THAT(reportsOf(result), AllOf(SizeIs(60), Each(Reports("worked", 0))));
+    // What fitted counts, and what did not is done again.
+    const ProcessResult again = resume(images, "validate");
+    EXPECT_EQ(again.exitStatus, 0);
+    EXPECT_EQ(resumedOf(again) + reportsOf(again).size(), 60U);
+    EXPECT_EQ(resumedOf(resume(images, "validate")), 60U);
+}
+
+// Runs that are killed.
+
+TEST_F(BatchResume, AKilledRunGoesOnWhereItWas) {
+    const auto bundles = writeBundles(60);
+    serveRecords();
+    std::size_t said = 0;  // in runs that were killed: a line of each is in the journal, or was just to be
+    for (const std::size_t last : {0U, 5U, 20U, 40U}) {
+        RunningProcess run(batchCommand(resuming(bundles)));
+        // One that is quicker than the test ends by itself.
+        if (last == 0) {
+            ASSERT_TRUE(service().waitForRequests(1));
+        } else {
+            run.waitForLine("{\"path\":\"" + bundles[last].path + "\"");
+        }
+        ::kill(run.id(), SIGKILL);
+        const ProcessResult result = run.wait();
+        said +=
+            reportsOf({.exitStatus = {}, .signal = 0, .output = wholeLinesOf(result.output), .errors = {}})
+                .size();
+        // A ticket is there as a whole, or what was there before, or nothing yet.
+        for (const Artefact& one : bundles) {
+            if (!std::filesystem::exists(one.file())) continue;
+            EXPECT_TRUE(readFile(one.file()) == one.contents || isStapled(one, issuedFor(one))) << one.path;
+        }
+    }
+    askedFor();
+    const ProcessResult last = resume(bundles);
+    EXPECT_EQ(last.exitStatus, 0) << last.output;
+    const auto resumed = resumedOf(last);
+    EXPECT_GE(resumed, said);
+    EXPECT_GE(said, 1U);
+    EXPECT_EQ(resumed + reportsOf(last).size(), 60U);
+    EXPECT_THAT(askedFor(), SizeIs(60U - resumed));
+    EXPECT_EQ(countStapled(bundles), 60U);
+    EXPECT_EQ(resumedOf(resume(bundles)), 60U);
+}
+
+// Signals.
+
+class BatchSignal : public BatchResume, public testing::WithParamInterface<std::pair<int, int>> {
+  protected:
+    int signal() const { return GetParam().first; }
+    int status() const { return GetParam().second; }
+};
+
+TEST_P(BatchSignal, EndsWhatWaitsForTheService) {
+    const auto images = writeImages(10);
+    const Gate gate;
+    for (int i = 0; i < 4; ++i) service().enqueue(Script().readRequest().waitFor(gate));
+    serveRecords();
+    RunningProcess run(batchCommand(resuming(images)));
+    ASSERT_TRUE(gate.waitUntilReached());
+    run.sendSignal(signal());
+    const ProcessResult result = run.wait();
+    EXPECT_EQ(result.exitStatus, status());
+    EXPECT_THAT(reportsOf(result), AllOf(SizeIs(10), Each(Reports("interrupted", status()))));
+    EXPECT_EQ(summaryOf(result)["exitStatus"].unsignedIntegerValue(), static_cast<std::uint64_t>(status()));
+    for (const Artefact& image : images) EXPECT_EQ(readFile(image.path), image.contents);
+    gate.open();
+    EXPECT_EQ(resume(images).exitStatus, 0);
+    EXPECT_EQ(countStapled(images), 10U);
+}
+
+TEST_P(BatchSignal, FinishesTheWritesUnderWay) {
+    const auto images = writeImages(60);
+    serveRecords();
+    Command command = batchCommand(resuming(images));
+    command.arguments.insert(command.arguments.end(), {"--jobs", "2"});
+    RunningProcess run(command);
+    ASSERT_TRUE(run.waitForLine("{\"path\"").has_value());
+    ::kill(run.id(), signal());
+    const ProcessResult result = run.wait();
+    // It may have been done before the signal came; else each artefact is one or the other, and said to be.
+    EXPECT_THAT(result.exitStatus, testing::Optional(testing::AnyOf(0, status())));
+    const auto reports = reportsOf(result);
+    EXPECT_THAT(reports, SizeIs(60));
+    std::size_t worked = 0;
+    for (const Value& report : reports) {
+        const bool isDone = *report["cause"].string() == "worked";
+        EXPECT_THAT(report, isDone ? Reports("worked", 0) : Reports("interrupted", status()));
+        const auto image = std::find_if(images.begin(), images.end(), [&](const Artefact& one) {
+            return one.path == *report["path"].string();
+        });
+        ASSERT_NE(image, images.end());
+        EXPECT_EQ(readFile(image->path), isDone ? image->stapledWith(issuedFor(*image)) : image->contents);
+        worked += isDone ? 1U : 0U;
+    }
+    EXPECT_GE(worked, 1U);
+    askedFor();
+    const ProcessResult rest = resume(images);
+    EXPECT_EQ(resumedOf(rest), worked);
+    EXPECT_THAT(askedFor(), SizeIs(60 - worked));
+    EXPECT_EQ(countStapled(images), 60U);
+}
+
+TEST_P(BatchSignal, EndsARunThatWaitsForItsList) {
+    const auto images = writeImages(1);
+    serveRecords();
+    const std::string list = directory / "builds/list";
+    ASSERT_EQ(::mkfifo(list.c_str(), 0600), 0);
+    RunningProcess run(batchCommand({"staple", "--json", "--from", list}));
+    const foundation::FileDescriptor writer(::open(list.c_str(), O_WRONLY | O_CLOEXEC));
+    const std::string line = images[0].path + "\n";
+    ASSERT_EQ(::write(writer.get(), line.data(), line.size()), static_cast<ssize_t>(line.size()));
+    ASSERT_TRUE(run.waitForLine("{\"path\"").has_value());
+    run.sendSignal(signal());
+    const ProcessResult result = run.wait();
+    EXPECT_EQ(result.exitStatus, status());
+    EXPECT_EQ(summaryOf(result)["worked"].unsignedIntegerValue(), 1U);
+}
+
+TEST_P(BatchSignal, EndsARunWhoseListNobodyWrites) {
+    const std::string list = directory / "builds/list";
+    ASSERT_EQ(::mkfifo(list.c_str(), 0600), 0);
+    RunningProcess run(batchCommand({"staple", "--from", list, directory / "builds/missing"}));
+    ASSERT_TRUE(run.waitForLineWith("missing").has_value());
+    run.sendSignal(signal());
+    EXPECT_EQ(run.wait().exitStatus, status());
+}
+
+INSTANTIATE_TEST_SUITE_P(Which, BatchSignal,
+                         testing::Values(std::pair(SIGINT, 130), std::pair(SIGTERM, 143),
+                                         std::pair(SIGHUP, 129)),
+                         [](const auto& row) { return "Ends" + std::to_string(row.param.second); });
+
+// Two at once.
+
+TEST_F(BatchResume, TwoRunsOverOneListStapleEachArtefactWhole) {
+    const auto images = writeImages(60);
+    const auto bundles = writeBundles(20);
+    serveRecords();
+    std::vector<std::string> arguments{"staple", "--json"};
+    for (const auto& paths : {pathsOf(images), pathsOf(bundles)})
+        arguments.insert(arguments.end(), paths.begin(), paths.end());
+    RunningProcess first(batchCommand(arguments));
+    RunningProcess second(batchCommand(arguments));
+    for (RunningProcess* const run : {&first, &second}) {
+        const ProcessResult result = run->wait();
+        EXPECT_EQ(result.exitStatus, 0) << result.output << result.errors;
+        EXPECT_THAT(reportsOf(result), AllOf(SizeIs(80), Each(Reports("worked", 0))));
+    }
+    EXPECT_EQ(countStapled(images) + countStapled(bundles), 80U);
+}
+
+TEST_F(BatchResume, TwoRunsWithOneJournalKeepItWhole) {
+    const auto images = writeImages(80);
+    serveRecords();
+    const std::vector<Artefact> half(images.begin(), images.begin() + 40);
+    const std::vector<Artefact> other(images.begin() + 40, images.end());
+    RunningProcess first(batchCommand(resuming(half)));
+    RunningProcess second(batchCommand(resuming(other)));
+    EXPECT_EQ(first.wait().exitStatus, 0);
+    EXPECT_EQ(second.wait().exitStatus, 0);
+    EXPECT_EQ(resumedOf(resume(images)), 80U);
+}
+
+TEST_F(BatchResume, ManyRunsThatMakeOneJournalMakeItOnce) {
+    const auto images = writeImages(8);
+    serveRecords();
+    std::vector<std::unique_ptr<RunningProcess>> runs;
+    for (const Artefact& image : images)
+        runs.push_back(std::make_unique<RunningProcess>(batchCommand(resuming({image}))));
+    for (const auto& run : runs) EXPECT_EQ(run->wait().exitStatus, 0);
+    EXPECT_EQ(resumedOf(resume(images)), 8U);
+}
+
+}  // namespace
+}  // namespace pinwell::test
