@@ -66,7 +66,8 @@ std::string helpOf(const Program& program) {
                 command.name + " [OPTION]... [--] " + command.arguments + "\n";
     text += "\nSubcommands:\n";
     for (const Command& command : program.commands) text += helpLine(command.name, command.help);
-    text += "\n" + program.name + " COMMAND --help lists the options of a command.\n";
+    text += "\nOptions:\n" + helpLine("-h,--help", "Print this help, and after a command that of the command") +
+            helpLine("    --version", "Print the version");
     return text + (program.epilogue.empty() ? "" : "\n" + program.epilogue + "\n");
 }
 

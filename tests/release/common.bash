@@ -5,7 +5,7 @@
 
 # The long and short options in a program's help, one a line. They stand at the left of the table of options.
 options_in_help() {
-  sed -nE 's/^ +((-[a-z],)?--[a-z-]+).*/\1/p' | tr , '\n' | sort -u
+  sed -nE 's/^ +((-[a-z0-9],)?--[a-z-]+).*/\1/p' | tr , '\n' | sort -u
 }
 
 # The subcommands in a program's help, one a line.
