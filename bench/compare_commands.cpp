@@ -1,11 +1,11 @@
 // Times two commands against each other in one run:
-//   compare_commands [--memory MEBIBYTES] RUNS LIMIT COMMAND... -- PEER...
+//   compare_commands [--memory MEBIBYTES] [--time MILLISECONDS] RUNS LIMIT COMMAND... -- PEER...
 //
 // The two are run by turns, so that whatever else the machine does weighs on both alike. Prints the median
 // wall time of each, their ratio, the fastest run of each, which says more on a busy machine, and the most
-// memory that a run of each had. Exits with 1 when the ratio of the medians is above LIMIT ("inf" for none)
-// or COMMAND had more memory than MEBIBYTES, 0 otherwise, and with 70 when a command could not be run or
-// ended otherwise than its first run did.
+// memory that a run of each had. Exits with 1 when the ratio of the medians is above LIMIT ("inf" for none),
+// COMMAND had more memory than MEBIBYTES, or its median is above MILLISECONDS, 0 otherwise, and with 70 when
+// a command could not be run or ended otherwise than its first run did.
 #include <fcntl.h>
 #include <spawn.h>
 #include <sys/resource.h>
@@ -19,6 +19,7 @@
 #include <cstring>
 #include <limits>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 extern char** environ;
@@ -83,8 +84,11 @@ class Contender {
 
 int main(int argc, char** argv) {
     double memoryLimit = std::numeric_limits<double>::infinity();
-    if (argc > 2 && std::string_view(argv[1]) == "--memory") {
-        memoryLimit = std::strtod(argv[2], nullptr);
+    double timeLimit = std::numeric_limits<double>::infinity();
+    for (const auto& [option, value] :
+         {std::pair("--memory", &memoryLimit), std::pair("--time", &timeLimit)}) {
+        if (argc < 3 || std::string_view(argv[1]) != option) continue;
+        *value = std::strtod(argv[2], nullptr);
         argv += 2;
         argc -= 2;
     }
@@ -92,8 +96,10 @@ int main(int argc, char** argv) {
         std::find_if(argv, argv + argc, [](const char* word) { return std::string_view(word) == "--"; });
     const auto words = separator - argv;
     if (words < 4 || words + 1 >= argc) {
-        std::fprintf(stderr,
-                     "usage: compare_commands [--memory MEBIBYTES] RUNS LIMIT COMMAND... -- PEER...\n");
+        std::fprintf(
+            stderr,
+            "usage: compare_commands [--memory MEBIBYTES] [--time MILLISECONDS] RUNS LIMIT COMMAND... -- "
+            "PEER...\n");
         return kExitUsage;
     }
     const int runs = std::max(1, std::atoi(argv[1]));
@@ -111,5 +117,6 @@ int main(int argc, char** argv) {
         "%.2f ms against %.2f ms: ratio %.2f (limit %.2f); fastest %.2f and %.2f ms; %.1f and %.1f MiB\n",
         ours.median(), peer.median(), ratio, limit, ours.fastest(), peer.fastest(), ours.mebibytes(),
         peer.mebibytes());
-    return ratio > limit || ours.mebibytes() > memoryLimit ? kExitSlower : 0;
+    const bool keepsLimits = ratio <= limit && ours.mebibytes() <= memoryLimit && ours.median() <= timeLimit;
+    return keepsLimits ? 0 : kExitSlower;
 }

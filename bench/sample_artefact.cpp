@@ -4,6 +4,9 @@
 //   sample_artefact paged-image FILE      the same, with a hash for every page of an image
 //   sample_artefact bundle DIRECTORY FILES BYTES
 //                                         writes a bundle with that many sealed files of that many bytes
+//   sample_artefact images DIRECTORY COUNT
+//                                         writes small images without a signature; no two have the same hash,
+//                                         nor do those of another count
 //
 // A signature and a trailer are put behind the contents of an image, an archive's header and table of
 // contents over the beginning of a package. All else in the file is left as it lies on the disk.
@@ -76,10 +79,18 @@ void writeBundle(const std::string& bundle, int files, std::size_t size) {
     std::filesystem::permissions(executable, std::filesystem::perms::owner_all);
 }
 
+void writeImages(const std::string& folder, int count) {
+    for (int i = 1; i <= count; ++i) {
+        const std::string data = pinwell::foundation::format("image %d of %d", i, count);
+        pinwell::test::writeFile(pinwell::foundation::format("%@/Image%d.dmg", folder, i),
+                                 DiskImageBuilder().data(pinwell::foundation::toData(data)).build());
+    }
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
-    const std::string_view kind = argc == 3 || argc == 5 ? argv[1] : "";
+    const std::string_view kind = argc >= 3 && argc <= 5 ? argv[1] : "";
     try {
         if (kind == "image") {
             const std::uint64_t size = std::filesystem::file_size(argv[2]);
@@ -92,10 +103,13 @@ int main(int argc, char** argv) {
             signPages(argv[2]);
         } else if (kind == "bundle" && argc == 5) {
             writeBundle(argv[2], std::stoi(argv[3]), std::stoul(argv[4]));
+        } else if (kind == "images" && argc == 4) {
+            writeImages(argv[2], std::stoi(argv[3]));
         } else {
             std::fprintf(stderr,
                          "usage: sample_artefact image|package|paged-image FILE\n"
-                         "       sample_artefact bundle DIRECTORY FILES BYTES\n");
+                         "       sample_artefact bundle DIRECTORY FILES BYTES\n"
+                         "       sample_artefact images DIRECTORY COUNT\n");
             return kExitUsage;
         }
     } catch (const std::exception& failure) {
