@@ -72,6 +72,7 @@ in_root() {
     set -e
     root=$1 packages=$2 objects=$3
     shift 3
+    mount --bind "$root" "$root"  # a program in it can only have mounts of its own if it begins at one
     mount -t proc proc "$root/proc"
     mount --rbind /sys "$root/sys"
     mount --rbind /dev "$root/dev"

@@ -40,10 +40,11 @@ void expectDescription(const Variables& variables, const std::string& name, cons
                 std::string(kDescribed) + description + "\n");
 }
 
+// Later versions of the database begin a description with a capital.
 TEST(MIMEDescriptionDeathTest, IsEnglishWhateverTheLanguage) {
     expectDescription({{"LANG", "de_DE.UTF-8"}, {"LC_ALL", "de_DE.UTF-8"}, {"LANGUAGE", "de"}}, "a.txt",
-                      "plain text document");
-    expectDescription({{"LANG", "fr_FR.UTF-8"}, {"LANGUAGE", "fr:es"}}, "a.txt", "plain text document");
+                      "[Pp]lain text document");
+    expectDescription({{"LANG", "fr_FR.UTF-8"}, {"LANGUAGE", "fr:es"}}, "a.txt", "[Pp]lain text document");
 }
 
 // A database with one type of its own, translated before it is said in English.

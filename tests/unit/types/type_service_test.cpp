@@ -201,7 +201,8 @@ TEST_F(Types, AreDescribedByAShortNoun) {
     EXPECT_EQ(description(file("a.dmg")), "disk image");
     EXPECT_EQ(description(file("a.ISO")), "disk image");
     EXPECT_EQ(description(link("a.app")), "alias");
-    EXPECT_EQ(description(file("a.txt")), "plain text document");
+    // Later versions of the MIME database begin a description with a capital.
+    EXPECT_THAT(description(file("a.txt")), testing::AnyOf("plain text document", "Plain text document"));
     EXPECT_EQ(description(file("a")), "document");
     EXPECT_EQ(description(executable("a")), "document");
     EXPECT_EQ(description(file("a.zzunknown")), "document");
