@@ -118,7 +118,7 @@ class KeyMemory : public testing::Test {
         EXPECT_EQ(timesInMemory(traces.asLimbs), 0U);
     }
 
-    const test::TemporaryDirectory directory;
+    const pinwell::test::TemporaryDirectory directory;
     const std::string path = directory / "site";
 };
 
