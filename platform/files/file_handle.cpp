@@ -4,6 +4,8 @@
 #include <sys/resource.h>
 #include <unistd.h>
 
+#include <algorithm>
+#include <cerrno>
 #include <limits>
 #include <utility>
 
@@ -33,6 +35,16 @@ class LocalFileHandle final : public FileHandle {
         auto data = readUpTo(file_, length);
         if (!data) fail("read", data.error());
         return std::move(*data);
+    }
+
+    // Where no hole can be found, there is none: SEEK_DATA is unknown, or the position is past the end.
+    std::uint64_t nextData(std::uint64_t position) override {
+        const std::uint64_t now = moveTo(0, SEEK_CUR);
+        const off_t from = offset("seek in", position);
+        off_t data = lseek(file_.number(), from, SEEK_DATA);
+        if (data < 0 && errno == ENXIO) data = lseek(file_.number(), 0, SEEK_END);
+        moveTo(offset("seek in", now), SEEK_SET);
+        return std::max(position, static_cast<std::uint64_t>(std::max<off_t>(data, 0)));
     }
 
     void reserve(std::uint64_t length) override {

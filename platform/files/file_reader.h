@@ -10,6 +10,7 @@
 
 #include "foundation/bytes.h"
 #include "foundation/error.h"
+#include "foundation/sparse_bytes.h"
 
 namespace pinwell::files {
 
@@ -32,7 +33,18 @@ class FileReader {
 
     /// Up to `length` bytes; fewer only at the end of the file. Memory grows with what is really read.
     virtual foundation::Data read(std::uint64_t length) = 0;
+
+    /// The first position from `position` on that may have something other than zeros: in a sparse file the
+    /// end of a hole. The position for reading stays where it is.
+    virtual std::uint64_t nextData(std::uint64_t position) { return position; }
 };
+
+/// Up to `length` bytes from the position on; fewer only at the end of the file. For lengths that a file
+/// claims: memory is taken for what is there, not for holes and zeros. Throws FileHandleError.
+foundation::SharedBytes readShared(FileReader& file, std::uint64_t length);
+
+/// A buffer of that length. Throws FileHandleError if there is no address space for it.
+foundation::SparseBuffer makeBuffer(std::uint64_t length);
 
 /// The regular file at `path`, opened close-on-exec. Follows no link in the last component and never blocks
 /// on what is no regular file (EINVAL, EISDIR, ELOOP).

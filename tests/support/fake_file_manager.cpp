@@ -124,6 +124,7 @@ class RecordingFileManager::Handle final : public FileHandle {
     Data read(std::uint64_t length) override {
         return note("read"), real_->read(record_->readableOf(length));
     }
+    std::uint64_t nextData(std::uint64_t position) override { return real_->nextData(position); }
     void reserve(std::uint64_t length) override { note("reserve"), real_->reserve(length); }
     void write(ByteView bytes) override { note("write"), real_->write(bytes); }
     void truncate(std::uint64_t length) override { note("truncate"), real_->truncate(length); }

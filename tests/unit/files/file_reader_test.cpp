@@ -105,5 +105,31 @@ TEST_F(Reader, RefusesDescriptorsOfAnythingButARegularFile) {
     EXPECT_EQ(refusalOf(-1), EBADF);
 }
 
+// Data, a hole, data in the middle of a piece, and a hole up to the end.
+TEST_F(Reader, ReadsASparseFileAsWhatItIs) {
+    constexpr std::uint64_t kLength = 40ULL * 1024 * 1024;
+    writeFile(path("file"), std::string(5000, 'a'));
+    const FileDescriptor writer(open(path("file").c_str(), O_WRONLY | O_CLOEXEC));
+    ASSERT_EQ(pwrite(writer.get(), "middle", 6, 20'000'000), 6);
+    ASSERT_EQ(ftruncate(writer.get(), kLength), 0);
+    std::string expected(kLength, '\0');
+    expected.replace(0, 5000, 5000, 'a');
+    expected.replace(20'000'000, 6, "middle");
+
+    const auto reader = files::openReader(path("file"));
+    ASSERT_TRUE(reader);
+    EXPECT_TRUE(toString(files::readShared(**reader, kLength)) == expected);
+    (*reader)->seek(3000);
+    EXPECT_TRUE(toString(files::readShared(**reader, kLength - 4000)) ==
+                expected.substr(3000, kLength - 4000));
+    (*reader)->seek(19'000'000);
+    EXPECT_TRUE(toString(files::readShared(**reader, kLength)) == expected.substr(19'000'000))
+        << "no more than there is";
+}
+
+TEST_F(Reader, HoldsNoMoreThanThereIsAddressSpaceFor) {
+    EXPECT_THROW(files::makeBuffer(std::numeric_limits<std::uint64_t>::max() / 2), FileHandleError);
+}
+
 }  // namespace
 }  // namespace pinwell::test
