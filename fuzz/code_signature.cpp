@@ -20,7 +20,7 @@ bool liesWithin(ByteView part, ByteView whole) {
 
 void examineBlobs(ByteView superblob) {
     const auto blobs = codesign::parseSuperBlob(superblob);
-    require(blobs.size() <= codesign::kMaximumBlobCount, "blobs are counted");
+    require(blobs.size() <= superblob.size() / 16, "every blob takes its entry and its header");
     std::vector<std::pair<std::uint32_t, Data>> list;
     for (const auto& blob : blobs) {
         require(liesWithin(blob.bytes, superblob), "a blob lies within the superblob");
@@ -35,7 +35,7 @@ void examineBlobs(ByteView superblob) {
 }
 
 void examineDirectory(ByteView bytes) {
-    const auto directory = codesign::CodeDirectory::parse(bytes);
+    const auto directory = codesign::CodeDirectory::parse(foundation::toData(bytes));
     require(std::ranges::equal(directory.bytes(), bytes), "a code directory keeps its bytes");
     const std::size_t size = codesign::digestSize(directory.digestType());
     for (std::uint32_t slot = 0; slot <= 16; ++slot) {
@@ -48,7 +48,8 @@ void examineDirectory(ByteView bytes) {
 }
 
 void examineSignature(ByteView superblob) {
-    const auto signature = CodeSignature::parse(codesign::componentsOfSuperBlob(superblob));
+    const auto signature =
+        CodeSignature::parse(codesign::componentsOfSuperBlob(foundation::toData(superblob)));
     if (!signature) return;
     const auto information = signature->information(codesign::kSigningInformation);
     require(information.unique && information.cdHashes.front() == *information.unique,

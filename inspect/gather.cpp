@@ -14,6 +14,7 @@
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "src/PWHashedFile/file_kind.h"
 #include "src/PWHashedFile/package_trailer.h"
+#include "src/PWHashedFile/trailer_window.h"
 #include "src/ticket_record.h"
 
 namespace pinwell::inspect {
@@ -21,9 +22,6 @@ namespace {
 
 using foundation::ByteView;
 using foundation::URL;
-
-/// Trailers that are looked at: as many empty ones as the tool would go past on its way to the ticket.
-constexpr std::size_t kMaximumTrailersWalked = kMaximumUnknownTrailers / kTrailerSize + 1;
 
 std::optional<std::uint64_t> sizeOf(const std::string& path) {
     std::error_code error;
@@ -52,11 +50,11 @@ bool isDamagedRecord(const trailer_header& record) {
 /// Walks a package's trailers, past the first ticket and past damaged records, to the terminator.
 class TrailerWalk {
   public:
-    TrailerWalk(files::FileHandle& file, TrailerPlace& into) : file_(file), into_(into) {}
+    TrailerWalk(files::FileHandle& file, TrailerPlace& into) : file_(file), window_(file), into_(into) {}
 
     void run() {
         std::uint64_t position = file_.seekToEnd();
-        while (position >= kTrailerSize && into_.trailerCount < kMaximumTrailersWalked) {
+        while (position >= kTrailerSize) {
             const std::optional<std::uint64_t> next = step(position);
             if (!next) return;
             position = *next;
@@ -69,8 +67,7 @@ class TrailerWalk {
   private:
     std::optional<std::uint64_t> step(std::uint64_t position) {
         const std::uint64_t recordOffset = position - kTrailerSize;
-        file_.seek(recordOffset);
-        const Data bytes = file_.read(kTrailerSize);
+        const ByteView bytes = window_.readAt(recordOffset, kTrailerSize);
         if (bytes.size() != kTrailerSize) return std::nullopt;
         trailer_header record;
         std::copy(bytes.begin(), bytes.end(), record.bytes.begin());
@@ -99,11 +96,6 @@ class TrailerWalk {
         }
         found.data = {recordOffset - record.length(), record.length()};
         const bool isTicket = found.type == kTicketTrailerType;
-        if (!isTicket && !ticket_) unknownBytes_ += found.data.length + kTrailerSize;
-        if (unknownBytes_ > kMaximumUnknownTrailers) {
-            into_.fault = Fault{"the unknown trailers are too long", std::nullopt, recordOffset};
-            return std::nullopt;
-        }
         const Range data = found.data;
         keep(std::move(found));
         if (isTicket && !ticket_) ticket_ = data;
@@ -120,21 +112,16 @@ class TrailerWalk {
     }
 
     files::FileHandle& file_;
+    TrailerWindow window_;
     TrailerPlace& into_;
     std::optional<Range> ticket_;
-    std::uint64_t unknownBytes_ = 0;  // behind the ticket
 };
 
 /// The ticket's bytes within a superblob: the last one counts, as for the tool.
 std::optional<Range> ticketIn(ByteView superblob) {
-    std::optional<Range> found;
-    std::uint32_t count = 0;
-    for (const codesign::SurveyedBlob& blob :
-         codesign::surveySuperBlob(superblob, codesign::kMaximumBlobCount, count)) {
-        if (blob.slot != kTicketSlotType || blob.bytes.size() < kBlobHeaderSize) continue;
-        found = Range{blob.offset + std::uint64_t{kBlobHeaderSize}, blob.bytes.size() - kBlobHeaderSize};
-    }
-    return found;
+    const auto blob = codesign::surveyLastBlobOf(kTicketSlotType, superblob);
+    if (!blob || blob->bytes.size() < kBlobHeaderSize) return std::nullopt;
+    return Range{blob->offset + std::uint64_t{kBlobHeaderSize}, blob->bytes.size() - kBlobHeaderSize};
 }
 
 std::optional<Fault> placeFaultOf(const Place& place) {
@@ -247,7 +234,7 @@ void Inspector::gatherImage(const URL& url, Report& report) const {
         place.blobs = std::move(table.blobs);
         place.blobCount = table.blobCount;
         if (const auto found = ticketIn(image.superblob())) {
-            const ByteView bytes = ByteView(image.superblob()).subspan(found->offset, found->length);
+            const ByteView bytes = image.superblob().view().subspan(found->offset, found->length);
             report.ticket =
                 gatherTicket(bytes, image.csStart() + found->offset, report.codeHash, platform_.trust);
         }
@@ -269,11 +256,9 @@ void Inspector::gatherPackage(const URL& url, Report& report) const {
     try {
         TrailerWalk walk(**file, place);
         walk.run();
-        if (walk.ticket() && walk.ticket()->length > kMaximumTicket) {
-            place.fault = Fault{"the ticket is too long to be read", {}, walk.ticket()->offset};
-        } else if (walk.ticket()) {
+        if (walk.ticket()) {
             (*file)->seek(walk.ticket()->offset);
-            const Data bytes = (*file)->read(walk.ticket()->length);
+            const foundation::SharedBytes bytes = files::readShared(**file, walk.ticket()->length);
             report.ticket = gatherTicket(bytes, walk.ticket()->offset, report.codeHash, platform_.trust);
         }
     } catch (const files::FileHandleError& failure) {

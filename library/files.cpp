@@ -4,6 +4,7 @@
 #include "files/file_reader.h"
 #include "library/conversion.h"
 #include "src/PWHashedFile/disk_image_signature.h"
+#include "src/PWHashedFile/held_ticket.h"
 #include "src/PWHashedFile/package_trailer_walk.h"
 
 namespace pinwell::ticket {
@@ -19,12 +20,17 @@ using Opened = foundation::Result<std::unique_ptr<FileReader>>;
 /// The parsers' own messages, which name the file, are for the tool's verbose mode.
 constexpr const char* kNoName = "";
 
+/// A ticket is handed out whole or not at all.
+constexpr const char* kTooLong = "the ticket is too long to be read";
+bool isTooLong(std::uint64_t length) {
+    return heldOfTicket(length) != length;
+}
+
 Slot slotOf(const BlobRecord& blob, std::uint64_t superblobOffset) {
-    const std::uint32_t type = slotTypeOf(blob);
-    return {type,
-            std::string(slotName(type)),
-            blobMagicOf(blob),
-            {superblobOffset + blobOffsetOf(blob), lengthOf(blob)}};
+    return {blob.slotType,
+            std::string(slotName(blob.slotType)),
+            blob.magic,
+            {superblobOffset + blob.offset, blob.length()}};
 }
 
 Result<DiskImage> diskImageIn(FileReader& file) {
@@ -42,6 +48,7 @@ Result<DiskImage> diskImageIn(FileReader& file) {
     for (const BlobRecord& blob : read.blobs) image.slots.push_back(slotOf(blob, read.csStart));
     if (const BlobRecord* const blob = ticketBlobOf(read.blobs)) {
         const ByteView bytes = ticketIn(*blob);
+        if (isTooLong(bytes.size())) return malformed({read.csStart + blob->offset, kTooLong});
         const Range whole = slotOf(*blob, read.csStart).range;
         image.ticket = FoundTicket{{whole.offset + whole.length - bytes.size(), bytes.size()},
                                    foundation::toData(bytes)};
@@ -60,6 +67,7 @@ Result<FlatPackage> flatPackageIn(FileReader& file) {
     if (read.fault) return malformed(*read.fault);
     package.fileSize = read.fileSize;
     package.hasTerminator = read.hasTerminator;
+    if (isTooLong(read.ticketLength)) return malformed({read.ticketStart, kTooLong});
     if (read.ticket)
         package.ticket = FoundTicket{{read.ticketStart, read.ticketLength}, *std::move(read.ticket)};
     return package;

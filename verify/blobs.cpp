@@ -99,8 +99,8 @@ constexpr std::size_t kPreEncryption = 92;  // an offset, which differs with the
 
 bool saysTheSame(const Directory& a, const Directory& b) {
     const auto isSame = [&](std::size_t begin, std::size_t length) {
-        return std::ranges::equal(a.content.bytes().subspan(begin, length),
-                                  b.content.bytes().subspan(begin, length));
+        return std::ranges::equal(a.content.bytes().view().subspan(begin, length),
+                                  b.content.bytes().view().subspan(begin, length));
     };
     if (a.content.version() != b.content.version() || a.content.flags() != b.content.flags() ||
         a.content.identifier() != b.content.identifier() ||

@@ -24,17 +24,30 @@ namespace {
 /// A property list, or a seal. Longer ones are refused.
 constexpr std::uint64_t kMaximumComponent = foundation::kMaximumPropertyListSize;
 
-/// `nullopt` if there is no such file.
-std::optional<Data> componentAt(const DirectoryRef& root, const std::string& path) {
-    if (path.empty()) return std::nullopt;
+/// What `read` returns of the file; `nullopt` if there is no such file.
+template <class Read>
+auto readIfThere(const DirectoryRef& root, const std::string& path, Read read)
+    -> std::optional<decltype(read(*root->fileAt(path)))> {
     try {
-        const auto file = root->fileAt(path);
-        if (file->size() > kMaximumComponent) codesign::refuse(path + " is too long");
-        return file->read(0, static_cast<std::size_t>(file->size()));
+        return read(*root->fileAt(path));
     } catch (const CodeError& error) {
         if (error.status() != codesign::kStaticCodeNotFound) throw;
         return std::nullopt;
     }
+}
+
+std::optional<Data> componentAt(const DirectoryRef& root, const std::string& path) {
+    if (path.empty()) return std::nullopt;
+    return readIfThere(root, path, [&](const codesign::ByteSource& file) {
+        if (file.size() > kMaximumComponent) codesign::refuse(path + " is too long");
+        return file.read(0, static_cast<std::size_t>(file.size()));
+    });
+}
+
+/// A file of the separate form, of any length.
+std::optional<codesign::SharedBytes> signatureFileAt(const DirectoryRef& root, const std::string& name) {
+    return readIfThere(root, kSignatureDirectory + "/" + name,
+                       [](const codesign::ByteSource& file) { return file.readShared(0, file.size()); });
 }
 
 const Data* addressOf(const std::optional<Data>& data) {
@@ -45,12 +58,11 @@ const Data* addressOf(const std::optional<Data>& data) {
 VerifiedCode verifySeparately(const codesign::ByteSource& executable, const BundleLayout& layout,
                               const OutsideComponents& outside, const std::string& place, Workers& workers,
                               Section& section) {
-    const std::string directory = kSignatureDirectory + "/";
-    std::optional<Data> codeDirectory = componentAt(layout.root, directory + "CodeDirectory");
+    std::optional<codesign::SharedBytes> codeDirectory = signatureFileAt(layout.root, "CodeDirectory");
     if (!codeDirectory) return {};
     const std::optional<SignatureParts> parts = SignatureParts::fromSeparateFiles(
-        *std::move(codeDirectory), componentAt(layout.root, directory + "CodeRequirements"),
-        componentAt(layout.root, directory + "CodeSignature").value_or(Data()));
+        *std::move(codeDirectory), signatureFileAt(layout.root, "CodeRequirements"),
+        signatureFileAt(layout.root, "CodeSignature").value_or(codesign::SharedBytes()));
     section.pass(kSignature, place, "a well-formed signature");
     checkSigner(*parts, place, section);
     checkAgreement(*parts, place, section);

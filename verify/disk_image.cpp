@@ -75,7 +75,7 @@ VerifiedCode verified(const ByteSource& source, Workers& workers, Section& secti
     if (worstOutcome(section) == Outcome::failed) return {.isSigned = true, .identities = {}};
     checkBlockTables(source, *trailer, workers, section);
     if (!area) return {.isSigned = true, .identities = {}};
-    const Data superblob = codesign::readSuperBlob(source, area->offset, area->length);
+    const codesign::SharedBytes superblob = codesign::readSuperBlob(source, area->offset, area->length);
     checkBlobs(superblob, SignatureHost::diskImage, kImagePlace, section);
     const std::optional<SignatureParts> parts = SignatureParts::fromSuperBlob(superblob);
     if (!parts) return {.isSigned = true, .identities = {}};  // it carries a ticket and nothing else

@@ -72,7 +72,8 @@ class ImageCheck {
         const std::optional<FileRange> area = codesign::findImageSignature(source_, slice);
         if (!area) return false;
         try {
-            const Data superblob = codesign::readSuperBlob(source_, area->offset, area->length);
+            const codesign::SharedBytes superblob =
+                codesign::readSuperBlob(source_, area->offset, area->length);
             const std::optional<SignatureParts> parts = SignatureParts::fromSuperBlob(superblob);
             if (!parts) return false;
             section_.pass(kSignature, at, "a well-formed signature");

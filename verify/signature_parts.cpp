@@ -66,10 +66,10 @@ std::string Directory::digestName() const {
 
 ByteView Directory::codeDigest(std::uint32_t index) const {
     const std::size_t size = codesign::digestSize(content.digestType());
-    return content.bytes().subspan(hashOffset + std::size_t{index} * size, size);
+    return content.bytes().view().subspan(hashOffset + std::size_t{index} * size, size);
 }
 
-void SignatureParts::addDirectory(std::uint32_t slot, ByteView blob) {
+void SignatureParts::addDirectory(std::uint32_t slot, const codesign::SharedBytes& blob) {
     const bool isKnown = codesign::digestTypeNumbered(CodeDirectory::digestTypeNumberOf(blob)).has_value();
     if (slot != codesign::kSlotCodeDirectory && !isKnown) return;
     Directory directory = withFields(slot, CodeDirectory::parse(blob));
@@ -81,16 +81,15 @@ void SignatureParts::addDirectory(std::uint32_t slot, ByteView blob) {
     directories_.push_back(std::move(directory));
 }
 
-std::optional<SignatureParts> SignatureParts::fromSuperBlob(Data superblob) {
+std::optional<SignatureParts> SignatureParts::fromSuperBlob(codesign::SharedBytes superblob) {
     SignatureParts parts;
-    const ByteView bytes = parts.storage_.emplace_back(std::move(superblob));
-    std::map<std::uint32_t, ByteView> directories;
-    for (const codesign::Blob& blob : codesign::parseSuperBlob(bytes)) {
+    std::map<std::uint32_t, codesign::SharedBytes> directories;
+    for (const codesign::Blob& blob : codesign::parseSuperBlob(superblob)) {
         if (blob.slot == codesign::kSlotCms) {
             if (blob.magic != codesign::kWrapperMagic) refuse("the CMS blob has a wrong magic");
             parts.cms_ = blob.bytes.subspan(codesign::kBlobHeaderSize);
         } else if (isDirectorySlot(blob.slot)) {
-            directories.emplace(blob.slot, blob.bytes);
+            directories.emplace(blob.slot, superblob.share(blob.bytes));
         } else if (blob.slot < kEndOfComponentSlots && blob.slot != codesign::kSlotTrailer &&
                    !parts.components_.emplace(blob.slot, blob.bytes).second) {
             refuse(format("two components in slot %u", blob.slot));
@@ -100,18 +99,21 @@ std::optional<SignatureParts> SignatureParts::fromSuperBlob(Data superblob) {
     if (directories.begin()->first != codesign::kSlotCodeDirectory)
         refuse("alternate code directories without a primary one");
     for (const auto& [slot, blob] : directories) parts.addDirectory(slot, blob);
+    parts.storage_.push_back(std::move(superblob));
     return parts;
 }
 
-std::optional<SignatureParts> SignatureParts::fromSeparateFiles(Data directory,
-                                                                std::optional<Data> requirements, Data cms) {
+std::optional<SignatureParts> SignatureParts::fromSeparateFiles(
+    codesign::SharedBytes directory, std::optional<codesign::SharedBytes> requirements,
+    codesign::SharedBytes cms) {
     SignatureParts parts;
-    parts.storage_.reserve(3);
-    parts.addDirectory(codesign::kSlotCodeDirectory, parts.storage_.emplace_back(std::move(directory)));
-    if (requirements)
-        parts.components_.emplace(codesign::kSlotRequirements,
-                                  parts.storage_.emplace_back(*std::move(requirements)));
-    parts.cms_ = parts.storage_.emplace_back(std::move(cms));
+    parts.addDirectory(codesign::kSlotCodeDirectory, directory);
+    if (requirements) {
+        parts.components_.emplace(codesign::kSlotRequirements, requirements->view());
+        parts.storage_.push_back(*std::move(requirements));
+    }
+    parts.cms_ = cms.view();
+    parts.storage_.push_back(std::move(cms));
     return parts;
 }
 

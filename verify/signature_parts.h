@@ -45,11 +45,12 @@ class SignatureParts {
   public:
     /// From the bytes of a superblob, padding and all. `nullopt` if it has no code directory. Throws
     /// codesign::CodeError or foundation::ShortRead if it is not well formed.
-    static std::optional<SignatureParts> fromSuperBlob(Data superblob);
+    static std::optional<SignatureParts> fromSuperBlob(codesign::SharedBytes superblob);
 
     /// From the three files of the separate form.
-    static std::optional<SignatureParts> fromSeparateFiles(Data directory, std::optional<Data> requirements,
-                                                           Data cms);
+    static std::optional<SignatureParts> fromSeparateFiles(codesign::SharedBytes directory,
+                                                           std::optional<codesign::SharedBytes> requirements,
+                                                           codesign::SharedBytes cms);
 
     /// By slot; slot 0 is the first. Directories of unknown digest types are left out.
     const std::vector<Directory>& directories() const noexcept { return directories_; }
@@ -67,9 +68,9 @@ class SignatureParts {
 
   private:
     SignatureParts() = default;
-    void addDirectory(std::uint32_t slot, ByteView blob);
+    void addDirectory(std::uint32_t slot, const codesign::SharedBytes& blob);
 
-    std::vector<Data> storage_;  // what the views are of: moved, never copied
+    std::vector<codesign::SharedBytes> storage_;  // what the views are of
     std::vector<Directory> directories_;
     std::map<std::uint32_t, ByteView> components_;
     ByteView cms_;

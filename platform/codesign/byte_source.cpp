@@ -6,6 +6,8 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <new>
+#include <vector>
 
 #include "codesign/code_error.h"
 
@@ -26,6 +28,17 @@ Status statusOfLookup(std::int64_t reason) {
 
 namespace {
 
+/// Read at once: holds a signature of any usual size.
+constexpr std::uint64_t kPiece = 1024 * 1024;
+
+foundation::SparseBuffer bufferFor(std::uint64_t length) {
+    try {
+        return foundation::SparseBuffer(length);
+    } catch (const std::bad_alloc&) {
+        throw CodeError(kIOError, "there is no room to hold the signature");
+    }
+}
+
 foundation::FileDescriptor openToRead(const foundation::Places& places, const std::string& path) {
     const auto place = places.find(path);
     if (!place) throw CodeError(statusOfLookup(place.error().code()), "cannot open the file");
@@ -43,12 +56,28 @@ Data ByteSource::read(std::uint64_t offset, std::size_t length) const {
     return bytes;
 }
 
+SharedBytes ByteSource::readShared(std::uint64_t offset, std::uint64_t length) const {
+    checkRange(offset, length);
+    if (length <= kPiece) return read(offset, static_cast<std::size_t>(length));
+    foundation::SparseBuffer buffer = bufferFor(length);
+    std::vector<std::byte> piece(kPiece);
+    for (std::uint64_t done = 0; done < length;) {
+        done = std::min(std::max(nextData(offset + done), offset + done) - offset, length);
+        const std::span<std::byte> part =
+            std::span(piece).first(std::min<std::uint64_t>(kPiece, length - done));
+        readAll(offset + done, part);
+        buffer.put(done, part);
+        done += part.size();
+    }
+    return buffer;
+}
+
 void ByteSource::read(std::uint64_t offset, std::span<std::byte> buffer) const {
     checkRange(offset, buffer.size());
     readAll(offset, buffer);
 }
 
-void ByteSource::checkRange(std::uint64_t offset, std::size_t length) const {
+void ByteSource::checkRange(std::uint64_t offset, std::uint64_t length) const {
     if (offset > size() || length > size() - offset) refuse("a range reaches past the end of the file");
 }
 
@@ -66,6 +95,12 @@ FileSource::FileSource(const foundation::Places& places, const std::string& path
 
 void FileSource::expectSequentialReads() const {
     posix_fadvise(file_.get(), 0, 0, POSIX_FADV_SEQUENTIAL);
+}
+
+std::uint64_t FileSource::nextData(std::uint64_t offset) const {
+    const off_t data = lseek(file_.get(), static_cast<off_t>(offset), SEEK_DATA);
+    if (data >= 0) return static_cast<std::uint64_t>(data);
+    return errno == ENXIO ? size_ : offset;  // a hole up to the end; or holes are not to be had
 }
 
 std::size_t FileSource::readAt(std::uint64_t offset, std::span<std::byte> buffer) const {

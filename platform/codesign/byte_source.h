@@ -10,11 +10,13 @@
 #include "foundation/bytes.h"
 #include "foundation/file_io.h"
 #include "foundation/places.h"
+#include "foundation/sparse_bytes.h"
 
 namespace pinwell::codesign {
 
 using foundation::ByteView;
 using foundation::Data;
+using foundation::SharedBytes;
 
 /// What the service says of a file that cannot be looked up or opened, by the errno value.
 Status statusOfLookup(std::int64_t reason);
@@ -32,6 +34,10 @@ class ByteSource {
     /// first.
     Data read(std::uint64_t offset, std::size_t length) const;
 
+    /// The same for a length that the file itself claims: memory is taken for what is there, not for holes
+    /// and zeros. Throws CodeError (kIOError) also if there is no address space for it.
+    SharedBytes readShared(std::uint64_t offset, std::uint64_t length) const;
+
     /// The same into a buffer of the caller's, all of which is filled.
     void read(std::uint64_t offset, std::span<std::byte> buffer) const;
 
@@ -39,11 +45,14 @@ class ByteSource {
     virtual void expectSequentialReads() const {}
 
   protected:
+    /// The first position from `offset` on that may have something other than zeros; the size where none has.
+    virtual std::uint64_t nextData(std::uint64_t offset) const { return offset; }
+
     /// Fills as much of `buffer` as there are bytes at `offset` and answers how much that was.
     virtual std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const = 0;
 
   private:
-    void checkRange(std::uint64_t offset, std::size_t length) const;
+    void checkRange(std::uint64_t offset, std::uint64_t length) const;
     void readAll(std::uint64_t offset, std::span<std::byte> buffer) const;
 };
 
@@ -61,6 +70,7 @@ class FileSource final : public ByteSource {
 
   private:
     std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const override;
+    std::uint64_t nextData(std::uint64_t offset) const override;
 
     foundation::FileDescriptor file_;
     std::uint64_t size_ = 0;

@@ -1,6 +1,7 @@
 #include "codesign/code_description.h"
 
 #include <algorithm>
+#include <limits>
 #include <map>
 
 #include "codesign/cms_signature.h"
@@ -27,7 +28,7 @@ void guarded(Body body, Failed failed) {
     }
 }
 
-CodeDirectoryDescription describeDirectory(std::uint32_t slot, ByteView blob) {
+CodeDirectoryDescription describeDirectory(std::uint32_t slot, const SharedBytes& blob) {
     CodeDirectoryDescription description;
     description.slot = slot;
     guarded(
@@ -46,7 +47,7 @@ CodeDirectoryDescription describeDirectory(std::uint32_t slot, ByteView blob) {
 
 /// Directories, message, validity; `parsed` gives the components and may throw.
 template <class Parsed>
-void describeComponents(const std::map<std::uint32_t, ByteView>& directories, ByteView cms, Parsed parsed,
+void describeComponents(const std::map<std::uint32_t, SharedBytes>& directories, ByteView cms, Parsed parsed,
                         SignatureDescription& into) {
     for (const auto& [slot, blob] : directories) into.directories.push_back(describeDirectory(slot, blob));
     into.cmsLength = cms.size();
@@ -67,10 +68,10 @@ void describeComponents(const std::map<std::uint32_t, ByteView>& directories, By
 }
 
 template <class Completion>
-SignatureDescription describeSuperBlob(ByteView area, Completion completed) {
+SignatureDescription describeSuperBlob(const SharedBytes& area, Completion completed) {
     SignatureDescription description;
     std::uint32_t count = 0;
-    std::map<std::uint32_t, ByteView> directories;
+    std::map<std::uint32_t, SharedBytes> directories;
     ByteView cms;
     for (const SurveyedBlob& blob : surveySuperBlob(area, kMaximumBlobsDescribed, count)) {
         BlobDescription& shown = description.blobs.emplace_back();
@@ -85,7 +86,7 @@ SignatureDescription describeSuperBlob(ByteView area, Completion completed) {
         } else if (*blob.length > blob.bytes.size()) {
             shown.problem = "reaches past the superblob";
         }
-        if (isCodeDirectorySlot(blob.slot)) directories.emplace(blob.slot, blob.bytes);
+        if (isCodeDirectorySlot(blob.slot)) directories.emplace(blob.slot, area.share(blob.bytes));
         if (blob.slot == kSlotCms && blob.bytes.size() > kBlobHeaderSize && blob.magic == kWrapperMagic)
             cms = blob.bytes.subspan(kBlobHeaderSize);
     }
@@ -96,17 +97,18 @@ SignatureDescription describeSuperBlob(ByteView area, Completion completed) {
 }
 
 /// The superblob without its padding; where its header is wrong, the area as it is.
-Data readArea(const ByteSource& source, const FileRange& place) {
-    Data area;
+SharedBytes readArea(const ByteSource& source, const FileRange& place) {
+    SharedBytes area;
     guarded([&] { area = readSuperBlob(source, place.offset, place.length); }, [](Status, const char*) {});
     if (!area.empty()) return area;
-    return source.read(place.offset, static_cast<std::size_t>(
-                                         std::min<std::uint64_t>(place.length, kMaximumSuperBlobLength)));
+    // No offset of an index leads further.
+    return source.readShared(
+        place.offset, std::min<std::uint64_t>(place.length, std::numeric_limits<std::uint32_t>::max()));
 }
 
 SignatureDescription describeSeparateFiles(const SignatureComponents& components) {
     SignatureDescription description;
-    std::map<std::uint32_t, ByteView> directories;
+    std::map<std::uint32_t, SharedBytes> directories;
     for (const auto& [slot, blob] : components.blobs)
         if (isCodeDirectorySlot(slot)) directories.emplace(slot, blob);
     describeComponents(
@@ -116,7 +118,7 @@ SignatureDescription describeSeparateFiles(const SignatureComponents& components
 
 void describeSlice(const FileCode& code, std::optional<FileRange> place, SliceDescription& into) {
     if (!place) return;
-    const Data area = readArea(code.source(), *place);
+    const SharedBytes area = readArea(code.source(), *place);
     into.signature = describeSuperBlob(
         area, [&](SignatureComponents components) { return code.completed(std::move(components)); });
     into.signature->place = place;
@@ -157,7 +159,7 @@ const SliceDescription* CodeDescription::preferredSlice() const {
     return found == slices.end() ? nullptr : &*found;
 }
 
-SignatureDescription describeSignature(ByteView area) {
+SignatureDescription describeSignature(const foundation::SharedBytes& area) {
     return describeSuperBlob(area, [](SignatureComponents components) { return components; });
 }
 

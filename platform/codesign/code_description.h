@@ -79,7 +79,7 @@ struct CodeDescription {
 inline constexpr std::size_t kMaximumBlobsDescribed = 1024;
 
 /// The signature in the bytes of a superblob, or of the area set aside for one.
-SignatureDescription describeSignature(ByteView area);
+SignatureDescription describeSignature(const foundation::SharedBytes& area);
 
 CodeDescription describeCode(const std::string& path, const CodeAccess& access);
 

@@ -1,6 +1,7 @@
 #include "codesign/code_directory.h"
 
 #include <algorithm>
+#include <utility>
 
 #include "codesign/code_error.h"
 #include "foundation/byte_reader.h"
@@ -117,7 +118,7 @@ std::uint8_t CodeDirectory::digestTypeNumberOf(ByteView blob) {
     return reader.u8("digest type");
 }
 
-CodeDirectory CodeDirectory::parse(ByteView blob) {
+CodeDirectory CodeDirectory::parse(SharedBytes blob) {
     const ByteReader whole(blob);
     const Header header = readHeader(whole, blob.size());
     const std::optional<DigestType> type = digestTypeNumbered(header.digestType);
@@ -131,7 +132,7 @@ CodeDirectory CodeDirectory::parse(ByteView blob) {
     if (header.teamOffset != 0) {
         directory.teamIdentifier_ = readString(whole, header, header.teamOffset, "the team identifier");
     }
-    directory.bytes_ = foundation::toData(blob);
+    directory.bytes_ = std::move(blob);
     directory.version_ = header.version;
     directory.flags_ = header.flags;
     directory.hashOffset_ = header.hashOffset;

@@ -36,8 +36,11 @@
 #include <string>
 
 #include "codesign/digest.h"
+#include "foundation/sparse_bytes.h"
 
 namespace pinwell::codesign {
+
+using foundation::SharedBytes;
 
 inline constexpr std::uint32_t kCodeDirectoryMagic = 0xFADE0C02;
 inline constexpr std::uint32_t kOldestCodeDirectoryVersion = 0x20001;
@@ -54,12 +57,12 @@ inline constexpr std::size_t kMaximumCodeDirectories = 6;
 /// Bytes of the header of a code directory of this version.
 std::size_t codeDirectoryHeaderSize(std::uint32_t version);
 
-/// A well-formed code directory. A value: it owns a copy of its bytes.
+/// A well-formed code directory. A value: it shares its bytes.
 class CodeDirectory {
   public:
     /// `blob` with its header and nothing behind it. Throws CodeError or foundation::ShortRead when it is not
     /// well formed.
-    static CodeDirectory parse(ByteView blob);
+    static CodeDirectory parse(SharedBytes blob);
 
     /// The digest type a code directory claims, which may be none of ours. Throws as parse() does when `blob`
     /// is too short to tell, or no code directory.
@@ -70,7 +73,7 @@ class CodeDirectory {
     DigestType digestType() const noexcept { return digestType_; }
     const std::string& identifier() const noexcept { return identifier_; }
     const std::optional<std::string>& teamIdentifier() const noexcept { return teamIdentifier_; }
-    ByteView bytes() const noexcept { return bytes_; }
+    const SharedBytes& bytes() const noexcept { return bytes_; }
 
     /// The digest that special slot `slot` (from 1 on) demands of its component; nothing when the directory
     /// has no such slot or its digest is all zero, which demands nothing.
@@ -82,7 +85,7 @@ class CodeDirectory {
   private:
     CodeDirectory() = default;
 
-    Data bytes_;
+    SharedBytes bytes_;
     std::uint32_t version_ = 0;
     std::uint32_t flags_ = 0;
     std::uint32_t hashOffset_ = 0;

@@ -16,22 +16,22 @@ namespace {
 constexpr std::uint32_t kCoveredSlots[] = {kSlotRequirements, kSlotEntitlements, kSlotTrailer,
                                            kSlotDerEntitlements};
 
-Data unwrapCms(const Blob& blob) {
+ByteView unwrapCms(const Blob& blob) {
     if (blob.magic != kWrapperMagic) refuse("the CMS blob has a wrong magic");
-    return foundation::toData(blob.bytes.subspan(kBlobHeaderSize));
+    return blob.bytes.subspan(kBlobHeaderSize);
 }
 
 }  // namespace
 
-SignatureComponents componentsOfSuperBlob(ByteView superblob) {
+SignatureComponents componentsOfSuperBlob(const SharedBytes& superblob) {
     SignatureComponents components;
     std::size_t directories = 0;
     for (const Blob& blob : parseSuperBlob(superblob)) {
         if (blob.magic == kCodeDirectoryMagic) ++directories;
         if (blob.slot == kSlotCms) {
-            components.cms = unwrapCms(blob);
+            components.cms = superblob.share(unwrapCms(blob));
         } else if (isSlotOfSignature(blob.slot)) {
-            components.blobs.emplace(blob.slot, foundation::toData(blob.bytes));
+            components.blobs.emplace(blob.slot, superblob.share(blob.bytes));
         }
     }
     if (directories > kMaximumCodeDirectories) refuse("too many code directories");
@@ -58,7 +58,7 @@ std::optional<CodeSignature> CodeSignature::parse(SignatureComponents components
     if (directories.empty()) return std::nullopt;
 
     CodeSignature signature;
-    signature.primary_ = foundation::toData(directories.front().bytes());
+    signature.primary_ = directories.front().bytes();
     const auto strongest = std::max_element(
         directories.begin(), directories.end(), [](const CodeDirectory& a, const CodeDirectory& b) {
             return digestStrength(a.digestType()) < digestStrength(b.digestType());

@@ -11,19 +11,16 @@
 
 namespace pinwell::codesign {
 
-/// Longest signature file of the separate form, for each of the three.
-inline constexpr std::size_t kMaximumSignatureFileLength = 16 * 1024 * 1024;
-
 /// The parts of a signature, by slot, each with its blob header; the CMS message without. What a signature
 /// lacks is not in here.
 struct SignatureComponents {
-    std::map<std::uint32_t, Data> blobs;
-    Data cms;
+    std::map<std::uint32_t, SharedBytes> blobs;
+    SharedBytes cms;
 };
 
-/// The components of a superblob; those that nothing here asks for are left behind. Throws CodeError or
-/// foundation::ShortRead.
-SignatureComponents componentsOfSuperBlob(ByteView superblob);
+/// The components of a superblob, which they share; those that nothing here asks for are left behind. Throws
+/// CodeError or foundation::ShortRead.
+SignatureComponents componentsOfSuperBlob(const SharedBytes& superblob);
 
 /// A signature whose code directories are well formed. Immutable.
 class CodeSignature {
@@ -50,7 +47,7 @@ class CodeSignature {
 
     SignatureComponents components_;
     std::vector<CodeDirectory> directories_;  // the strongest first, the others in slot order
-    Data primary_;                            // slot 0, which the CMS message is over
+    SharedBytes primary_;                     // slot 0, which the CMS message is over
 };
 
 }  // namespace pinwell::codesign

@@ -51,14 +51,6 @@ struct SigningInformation {
     std::optional<Date> secureTimestamp;
 };
 
-/// Limits of a signature's superblob, which hold for whoever else reads one: what the one takes for a
-/// signature must be one to the other. Room for 64 MiB of signature (its page hashes, 32 bytes for 4 KiB, are
-/// those of 8 GiB of code) and for a stapled ticket of 64 MiB, the longest there is.
-inline constexpr std::uint32_t kMaximumSuperBlobLength = 128 * 1024 * 1024;
-
-/// Most entries of its index; a signature has about ten.
-inline constexpr std::uint32_t kMaximumBlobCount = 65'536;
-
 /// Which sets of information are wanted; may be combined. Team identifier and secure timestamp belong to the
 /// signing set, all else is in every set; the other two add nothing here.
 inline constexpr std::uint32_t kInternalInformation = 1;

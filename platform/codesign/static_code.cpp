@@ -9,11 +9,10 @@ namespace pinwell::codesign {
 namespace {
 
 /// A whole file of the separate form; nothing when it is not there.
-std::optional<Data> readSignatureFile(const foundation::Places& places, const std::string& path) {
+std::optional<SharedBytes> readSignatureFile(const foundation::Places& places, const std::string& path) {
     try {
         const FileSource file(places, path);
-        if (file.size() > kMaximumSignatureFileLength) refuse("a signature file is too long");
-        return file.read(0, static_cast<std::size_t>(file.size()));
+        return file.readShared(0, file.size());
     } catch (const CodeError& error) {
         if (error.status() == kStaticCodeNotFound) return std::nullopt;
         throw;
@@ -24,14 +23,15 @@ std::optional<Data> readSignatureFile(const foundation::Places& places, const st
 
 std::optional<SignatureComponents> componentsOfSeparateFiles(const foundation::Places& places,
                                                              const std::string& directory) {
-    std::optional<Data> codeDirectory = readSignatureFile(places, directory + "/CodeDirectory");
+    std::optional<SharedBytes> codeDirectory = readSignatureFile(places, directory + "/CodeDirectory");
     if (!codeDirectory) return std::nullopt;
     SignatureComponents components;
     components.blobs.emplace(kSlotCodeDirectory, std::move(*codeDirectory));
-    if (std::optional<Data> requirements = readSignatureFile(places, directory + "/CodeRequirements")) {
+    if (std::optional<SharedBytes> requirements =
+            readSignatureFile(places, directory + "/CodeRequirements")) {
         components.blobs.emplace(kSlotRequirements, std::move(*requirements));
     }
-    components.cms = readSignatureFile(places, directory + "/CodeSignature").value_or(Data());
+    components.cms = readSignatureFile(places, directory + "/CodeSignature").value_or(SharedBytes());
     return components;
 }
 
@@ -76,7 +76,7 @@ SignatureComponents FileCode::completed(SignatureComponents components) const {
     return components;
 }
 
-std::optional<CodeSignature> FileCode::signatureFrom(ByteView superblob) const {
+std::optional<CodeSignature> FileCode::signatureFrom(const SharedBytes& superblob) const {
     return CodeSignature::parse(completed(componentsOfSuperBlob(superblob)));
 }
 
@@ -132,7 +132,7 @@ std::vector<CodeSignature> FileCode::allSignatures() {
     return all;
 }
 
-void FileCode::setDetachedSignature(ByteView superblob) {
+void FileCode::setDetachedSignature(const SharedBytes& superblob) {
     std::optional<CodeSignature> detached = signatureFrom(superblob);
     if (!detached) refuse("the detached signature has no code directory");
     signature_ = std::move(detached);

@@ -79,7 +79,7 @@ class FileCode final : public StaticCode {
     std::vector<CodeSignature> allSignatures();
 
     /// Answers from the signature in `superblob` from now on. Throws CodeError or foundation::ShortRead.
-    void setDetachedSignature(ByteView superblob);
+    void setDetachedSignature(const SharedBytes& superblob);
 
   private:
     FileCode(CodeKind kind, std::string file, std::unique_ptr<ByteSource> source,
@@ -87,7 +87,7 @@ class FileCode final : public StaticCode {
              std::shared_ptr<foundation::Places> places, foundation::Anchor anchor);
 
     std::optional<CodeSignature> readSignature() const;
-    std::optional<CodeSignature> signatureFrom(ByteView superblob) const;
+    std::optional<CodeSignature> signatureFrom(const SharedBytes& superblob) const;
 
     CodeKind kind_;
     std::string file_;  // a bundle's main executable, or the file itself

@@ -12,6 +12,8 @@ using foundation::ByteReader;
 
 namespace {
 
+constexpr std::size_t kIndexEntrySize = 8;
+
 struct Range {
     std::uint64_t begin;
     std::uint64_t end;
@@ -21,7 +23,6 @@ std::uint32_t readMagicAndLength(ByteReader& reader) {
     if (reader.be32("superblob magic") != kSuperBlobMagic) refuse("not a superblob");
     const std::uint32_t length = reader.be32("superblob length");
     if (length < kSuperBlobHeaderSize) refuse("the superblob is shorter than its header");
-    if (length > kMaximumSuperBlobLength) refuse("the superblob is too long");
     return length;
 }
 
@@ -38,6 +39,38 @@ void requireSeparate(std::vector<Range> ranges) {
     const auto overlap =
         std::adjacent_find(ranges.begin(), ranges.end(), [](Range a, Range b) { return b.begin < a.end; });
     if (overlap != ranges.end()) refuse("blobs overlap");
+}
+
+SurveyedBlob surveyBlob(ByteView superblob, std::uint32_t slot, std::uint32_t offset) {
+    SurveyedBlob blob{.slot = slot, .offset = offset, .magic = {}, .length = {}, .bytes = {}};
+    if (offset >= superblob.size()) return blob;
+    blob.bytes = superblob.subspan(offset);
+    if (blob.bytes.size() < kBlobHeaderSize) return blob;
+    ByteReader header(blob.bytes);
+    blob.magic = header.be32("blob magic");
+    blob.length = header.be32("blob length");
+    blob.bytes = blob.bytes.first(std::min<std::size_t>(*blob.length, blob.bytes.size()));
+    return blob;
+}
+
+// Shows `visit` one entry of the index after the other, while it returns true. Returns the count as stated, 0
+// where there is none.
+template <class Visit>
+std::uint32_t survey(ByteView superblob, Visit visit) {
+    std::uint32_t count = 0;
+    try {
+        ByteReader index(superblob);
+        index.skip(8, "superblob magic and length");
+        count = index.be32("superblob count");
+        for (std::uint32_t i = 0; i < count; ++i) {
+            const std::uint32_t slot = index.be32("index slot");
+            const std::uint32_t offset = index.be32("index offset");
+            if (!visit(surveyBlob(superblob, slot, offset))) break;
+        }
+    } catch (const foundation::ShortRead&) {
+        // An entry that is cut off is none.
+    }
+    return count;
 }
 
 }  // namespace
@@ -59,10 +92,13 @@ std::vector<Blob> parseSuperBlob(ByteView superblob) {
     ByteReader index = whole;
     index.seek(8, "superblob count");
     const std::uint32_t count = index.be32("superblob count");
-    if (count > kMaximumBlobCount) refuse("too many blobs");
+    // Before anything is sized by it.
+    static_cast<void>(index.sub(index.position(), std::uint64_t{kIndexEntrySize} * count, "superblob index"));
 
     std::vector<Blob> blobs;
-    std::vector<Range> ranges = {{0, kSuperBlobHeaderSize + std::uint64_t{8} * count}};
+    std::vector<Range> ranges = {{0, kSuperBlobHeaderSize + std::uint64_t{kIndexEntrySize} * count}};
+    blobs.reserve(count);
+    ranges.reserve(count + std::size_t{1});
     for (std::uint32_t i = 0; i < count; ++i) {
         const std::uint32_t slot = index.be32("index slot");
         const std::uint32_t offset = index.be32("index offset");
@@ -81,28 +117,20 @@ std::vector<Blob> parseSuperBlob(ByteView superblob) {
 
 std::vector<SurveyedBlob> surveySuperBlob(ByteView superblob, std::size_t maximum, std::uint32_t& count) {
     std::vector<SurveyedBlob> blobs;
-    count = 0;
-    const ByteReader whole(superblob);
-    ByteReader index = whole;
-    try {
-        index.skip(8, "superblob magic and length");
-        count = index.be32("superblob count");
-        for (std::uint32_t i = 0; i < count && i < maximum; ++i) {
-            SurveyedBlob& blob = blobs.emplace_back();
-            blob.slot = index.be32("index slot");
-            blob.offset = index.be32("index offset");
-            if (blob.offset >= superblob.size()) continue;
-            blob.bytes = superblob.subspan(blob.offset);
-            if (blob.bytes.size() < kBlobHeaderSize) continue;
-            ByteReader header(blob.bytes);
-            blob.magic = header.be32("blob magic");
-            blob.length = header.be32("blob length");
-            blob.bytes = blob.bytes.first(std::min<std::size_t>(*blob.length, blob.bytes.size()));
-        }
-    } catch (const foundation::ShortRead&) {
-        if (!blobs.empty()) blobs.pop_back();  // the entry itself is cut off
-    }
+    count = survey(superblob, [&](const SurveyedBlob& blob) {
+        blobs.push_back(blob);
+        return blobs.size() < maximum;
+    });
     return blobs;
+}
+
+std::optional<SurveyedBlob> surveyLastBlobOf(std::uint32_t slot, ByteView superblob) {
+    std::optional<SurveyedBlob> last;
+    survey(superblob, [&](const SurveyedBlob& blob) {
+        if (blob.slot == slot && blob.magic) last = blob;
+        return true;
+    });
+    return last;
 }
 
 Data buildSuperBlob(const std::vector<std::pair<std::uint32_t, Data>>& blobs) {
@@ -119,13 +147,13 @@ Data buildSuperBlob(const std::vector<std::pair<std::uint32_t, Data>>& blobs) {
     return std::move(writer).take();
 }
 
-Data readSuperBlob(const ByteSource& source, std::uint64_t offset, std::uint64_t areaLength) {
+SharedBytes readSuperBlob(const ByteSource& source, std::uint64_t offset, std::uint64_t areaLength) {
     if (areaLength < kSuperBlobHeaderSize) refuse("the signature area is too short for a superblob");
     const Data start = source.read(offset, kSuperBlobHeaderSize);
     ByteReader header(start);
     const std::uint32_t length = readMagicAndLength(header);
     if (length > areaLength) refuse("the superblob is longer than its area");
-    return source.read(offset, length);
+    return source.readShared(offset, length);
 }
 
 }  // namespace pinwell::codesign

@@ -12,9 +12,10 @@
 // The index may name the blobs in any order, and gaps may lie between them. What follows the superblob's own
 // length in the area set aside for it is padding and is never looked at.
 //
-// Refused: a wrong magic, a length or count that does not fit, two entries for a slot of the signature, blobs
-// that overlap each other or the index, and whatever exceeds the limits in code_signing.h. Other slots, that
-// of the ticket for one, may have any number of entries.
+// Refused: a wrong magic, a length or count that does not fit, two entries for a slot of the signature, and
+// blobs that overlap each other or the index. Other slots, that of the ticket for one, may have any number of
+// entries. There is no limit on the length or on the number of blobs: a record here takes 40 bytes for the 16
+// that the smallest blob takes in the file.
 #pragma once
 
 #include <cstdint>
@@ -76,9 +77,12 @@ struct SurveyedBlob {
 /// is none.
 std::vector<SurveyedBlob> surveySuperBlob(ByteView superblob, std::size_t maximum, std::uint32_t& count);
 
+/// The last entry for `slot` whose blob has a header, by the same rules; `nullopt` if there is none.
+std::optional<SurveyedBlob> surveyLastBlobOf(std::uint32_t slot, ByteView superblob);
+
 /// The superblob that stands in `source` at `offset`, in an area of `areaLength` bytes, without its padding.
 /// Only the superblob itself is read. Throws CodeError.
-Data readSuperBlob(const ByteSource& source, std::uint64_t offset, std::uint64_t areaLength);
+SharedBytes readSuperBlob(const ByteSource& source, std::uint64_t offset, std::uint64_t areaLength);
 
 /// The superblob of these blobs (slot, bytes with header), back to back in this order.
 Data buildSuperBlob(const std::vector<std::pair<std::uint32_t, Data>>& blobs);

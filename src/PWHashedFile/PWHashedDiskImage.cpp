@@ -3,6 +3,7 @@
 #include <utility>
 
 #include "foundation/value.h"
+#include "src/PWHashedFile/held_ticket.h"
 #include "src/PWHashedFile/synthetic_cdhash.h"
 #include "src/cdhash_extract.h"
 #include "src/messages.h"
@@ -54,7 +55,8 @@ bool PWHashedDiskImage::makeUpForMissingSignature(const std::string& name) {
 std::optional<Data> PWHashedDiskImage::_ticketData() {
     const BlobRecord* const blob = ticketBlobOf(signature_.blobs);
     if (blob == nullptr) return std::nullopt;
-    return foundation::toData(ticketIn(*blob));
+    const foundation::ByteView ticket = ticketIn(*blob);
+    return foundation::toData(ticket.first(heldOfTicket(ticket.size())));
 }
 
 std::optional<Data> PWHashedDiskImage::_cdHash() {

@@ -19,7 +19,7 @@ class PWHashedDiskImage : public PWHashedFile {
     PWHashedDiskImage(const URL& fileURL, const Platform& platform);
 
     const UDIFFileHeader& dmgHeader() const noexcept { return signature_.trailer; }
-    const Data& superblob() const noexcept { return signature_.superblob; }
+    const foundation::SharedBytes& superblob() const noexcept { return signature_.superblob; }
     const BlobSet& blobs() const noexcept { return signature_.blobs; }
 
     /// Of an image that was unsigned when it was read.
@@ -54,7 +54,8 @@ class PWHashedDiskImage : public PWHashedFile {
     void saveDebugCopy(foundation::ByteView signatureAndTrailer, std::optional<Error>& held) const;
     void writeAtEndOfData(files::FileHandle& file, foundation::ByteView signatureAndTrailer,
                           const std::string& name) const;
-    bool writeSignature(Data superblob, const URL& target, bool deleteExisting, std::optional<Error>& held);
+    bool writeSignature(foundation::SparseBuffer signatureAndTrailer, const URL& target, bool deleteExisting,
+                        std::optional<Error>& held);
 
     disk_image_signature signature_;  // of an unsigned image, the empty one that was made up
     std::optional<Data> syntheticCDHash_;

@@ -2,6 +2,7 @@
 // end.
 #include <cerrno>
 #include <limits>
+#include <new>
 #include <utility>
 
 #include "foundation/bytes.h"
@@ -28,21 +29,26 @@ bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& sou
         return failedToWrite(held, error);
     }
 
-    Data superblob = superblobWithTicket(signature_.blobs, ticket);
-    if (!deleteExisting && !isReadableSuperblob(superblob))
+    if (!deleteExisting && !hasRoomForTicket(signature_.blobs, ticket))
         return refuseNewTicket(target, Error::posix(EFBIG, target.path()), error);
-    if (!superblob.empty() && !writeSignature(std::move(superblob), target, deleteExisting, held))
-        return failedToWrite(held, error);
+    try {
+        foundation::SparseBuffer superblob = superblobWithTicket(signature_.blobs, ticket, kUDIFHeaderSize);
+        if (superblob.size() != 0 && !writeSignature(std::move(superblob), target, deleteExisting, held))
+            return failedToWrite(held, error);
+    } catch (const std::bad_alloc&) {
+        return failedToWrite(Error::posix(ENOMEM, target.path()), error);
+    }
     setAppropriateExitCode(kExitOK);
     return true;
 }
 
-bool PWHashedDiskImage::writeSignature(Data superblob, const URL& target, bool deleteExisting,
-                                       std::optional<Error>& held) {
-    signature_.trailer.setCodeSign(signature_.csStart, superblob.size());
-    Data signatureAndTrailer = std::move(superblob);
-    foundation::append(signatureAndTrailer, signature_.trailer.bytes());
-    saveDebugCopy(signatureAndTrailer, held);
+// The buffer has the superblob, and room for the trailer behind it.
+bool PWHashedDiskImage::writeSignature(foundation::SparseBuffer signatureAndTrailer, const URL& target,
+                                       bool deleteExisting, std::optional<Error>& held) {
+    const std::size_t length = signatureAndTrailer.size() - kUDIFHeaderSize;
+    signature_.trailer.setCodeSign(signature_.csStart, length);
+    signatureAndTrailer.put(length, signature_.trailer.bytes());
+    saveDebugCopy(signatureAndTrailer.view(), held);
 
     const std::string name = target.lastPathComponent();
     const auto opened = platform().files.openForUpdating(target);
@@ -52,7 +58,7 @@ bool PWHashedDiskImage::writeSignature(Data superblob, const URL& target, bool d
         return false;
     }
     try {
-        writeAtEndOfData(**opened, signatureAndTrailer, name);
+        writeAtEndOfData(**opened, signatureAndTrailer.view(), name);
         return true;
     } catch (const files::FileHandleError& failure) {
         NoisyLog("Fatal error while %@ ticket to %@. %@.",

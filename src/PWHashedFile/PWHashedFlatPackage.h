@@ -27,7 +27,9 @@ class PWHashedFlatPackage : public PWHashedFile {
     bool hasTrailers() const noexcept { return trailers_.hasTrailers; }
 
     /// The unknown trailers behind the ticket, in file order; nothing when there are none.
-    const std::optional<Data>& dataToAppend() const noexcept { return trailers_.dataToAppend; }
+    const std::optional<foundation::SharedBytes>& dataToAppend() const noexcept {
+        return trailers_.dataToAppend;
+    }
 
     /// Walks the trailers from the last one to the first ticket or the terminator.
     std::optional<Data> _ticketData() override;
@@ -44,8 +46,8 @@ class PWHashedFlatPackage : public PWHashedFile {
 
   private:
     std::string name() const { return fileURL()->lastPathComponent(); }
-    Data tailWith(foundation::ByteView ticket) const;
-    std::optional<URL> saveMovedTrailers(files::FileHandle& file, foundation::ByteView tail) const;
+    foundation::SparseBuffer tailWith(foundation::ByteView ticket) const;
+    std::optional<URL> saveMovedTrailers(files::FileHandle& file, foundation::SparseBuffer& tail) const;
     void writeTail(files::FileHandle& file, foundation::ByteView tail, const std::string& targetName);
 
     package_trailers trailers_;  // but for the ticket itself, which is handed out

@@ -1,5 +1,4 @@
 // How a flat package gets its ticket, and loses it.
-#include <cerrno>
 #include <utility>
 
 #include "foundation/bytes.h"
@@ -24,8 +23,6 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
         return refuseNewTicket(target, held, error);
     const bool hasTicket =
         ticketData().has_value();  // the question reads the trailers, on which all below rests
-    if (!deleteExisting && trailers_.exceedsLimits)
-        return refuseNewTicket(target, Error::posix(EFBIG, target.path()), error);
     if (deleteExisting && !hasTicket) {
         NoisyLog("Cannot delete an existing ticket in %@ that doesn't exist.", targetName);
         return failedToWrite(held, error);
@@ -39,10 +36,10 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
     }
     std::optional<URL> copy;
     try {
-        const Data tail = tailWith(ticket);
+        foundation::SparseBuffer tail = tailWith(ticket);
         // A clone may be cut short: the original is still there.
         if (target == fileURL()) copy = saveMovedTrailers(**opened, tail);
-        writeTail(**opened, tail, targetName);
+        writeTail(**opened, tail.view().subspan(kTrailerSize), targetName);
         if (copy) static_cast<void>(platform().files.removeItem(*copy));
     } catch (const files::FileHandleError& failure) {
         if (copy) NoisyLog("The trailers of %@ are kept in %@.", targetName, copy->path());
@@ -54,29 +51,39 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
     return true;
 }
 
-Data PWHashedFlatPackage::tailWith(ByteView ticket) const {
-    Data tail = trailers_.dataToAppend.value_or(Data{});
+// With room in front for what the tail belongs behind: the terminator, or the record of some trailer.
+foundation::SparseBuffer PWHashedFlatPackage::tailWith(ByteView ticket) const {
+    const ByteView moved = trailers_.dataToAppend ? trailers_.dataToAppend->view() : ByteView();
+    const std::size_t recordSize = ticket.empty() ? 0 : kTrailerSize;
+    foundation::SparseBuffer tail =
+        files::makeBuffer(kTrailerSize + moved.size() + ticket.size() + recordSize);
+    tail.put(kTrailerSize, moved);
     if (ticket.empty()) return tail;
-    const trailer_header record = ticketTrailer(static_cast<std::uint32_t>(ticket.size()));
-    tail.insert(tail.end(), ticket.begin(), ticket.end());
-    tail.insert(tail.end(), record.bytes.begin(), record.bytes.end());
+    tail.put(kTrailerSize + moved.size(), ticket);
+    tail.put(kTrailerSize + moved.size() + ticket.size(),
+             ticketTrailer(static_cast<std::uint32_t>(ticket.size())).bytes);
     return tail;
 }
 
 // Trailers of others can be had from nowhere else. When some are about to move, all that will be written is
 // saved until it has been written, behind the bytes that it belongs behind and with their offset in the name.
-std::optional<URL> PWHashedFlatPackage::saveMovedTrailers(files::FileHandle& file, ByteView tail) const {
+// The copy is a help: the write goes on without it.
+std::optional<URL> PWHashedFlatPackage::saveMovedTrailers(files::FileHandle& file,
+                                                          foundation::SparseBuffer& tail) const {
     if (!trailers_.dataToAppend || trailers_.ticketStart < kTrailerSize) return std::nullopt;
     const std::uint64_t offset = trailers_.ticketStart - kTrailerSize;
-    file.seek(offset);
-    Data saved = file.read(kTrailerSize);
-    saved.insert(saved.end(), tail.begin(), tail.end());
-
+    try {
+        file.seek(offset);
+        const Data before = file.read(kTrailerSize);
+        if (before.size() != kTrailerSize) return std::nullopt;
+        tail.put(0, before);
+    } catch (const files::FileHandleError&) {
+        return std::nullopt;
+    }
     files::FileManager& files = platform().files;
     const URL copy = files.temporaryDirectory().appendingPathComponent(
         foundation::format("%@.%llu.pkgTrailers", foundation::globallyUniqueString(), offset));
-    const auto done = files.writeFile(saved, copy, files::FileManager::Writing::plain);
-    if (!done) throw files::FileHandleError(done.error().localizedFailureReason());
+    if (!files.writeFile(tail.view(), copy, files::FileManager::Writing::plain)) return std::nullopt;
     return copy;
 }
 

@@ -2,10 +2,9 @@
 
 #include <algorithm>
 #include <iterator>
-#include <set>
+#include <limits>
 #include <utility>
 
-#include "codesign/code_signing.h"
 #include "codesign/superblob.h"
 #include "foundation/byte_reader.h"
 #include "foundation/byte_writer.h"
@@ -18,6 +17,7 @@ using foundation::ByteView;
 using foundation::ByteWriter;
 using foundation::Data;
 using foundation::ShortRead;
+using foundation::SparseBuffer;
 
 namespace {
 
@@ -28,22 +28,30 @@ struct IndexEntry {
     auto operator<=>(const IndexEntry&) const = default;
 };
 
-// In index order and without repetitions; ends early where the superblob does.
+// In index order; ends early where the superblob does.
 std::vector<IndexEntry> readIndex(ByteView superblob, std::uint32_t count) {
     std::vector<IndexEntry> entries;
-    std::set<IndexEntry> known;
     try {
         ByteReader reader(superblob);
         reader.skip(kSuperblobHeaderSize, "superblob header");
+        entries.reserve(std::min<std::size_t>(count, reader.remaining() / kBlobIndexEntrySize));
         for (std::uint32_t i = 0; i < count; ++i) {
             const std::uint32_t slotType = reader.be32("slot type");
-            const IndexEntry entry{slotType, reader.be32("blob offset")};
-            if (known.insert(entry).second) entries.push_back(entry);
+            entries.push_back({slotType, reader.be32("blob offset")});
         }
     } catch (const ShortRead&) {
         // The entries that are missing are missed by the caller.
     }
     return entries;
+}
+
+bool hasEqualEntries(const std::vector<IndexEntry>& index) {
+    const auto leadsOn = [](const IndexEntry& a, const IndexEntry& b) { return a.offset < b.offset; };
+    const auto goesBack = [&](const IndexEntry& a, const IndexEntry& b) { return !leadsOn(a, b); };
+    if (std::adjacent_find(index.begin(), index.end(), goesBack) == index.end()) return false;
+    std::vector<IndexEntry> sorted = index;
+    std::sort(sorted.begin(), sorted.end());
+    return std::adjacent_find(sorted.begin(), sorted.end()) != sorted.end();
 }
 
 // The blob from entry.offset to `end`; nothing when it is not what its own header says. Throws ShortRead when
@@ -59,40 +67,41 @@ std::optional<BlobRecord> readBlob(ByteView superblob, const IndexEntry& entry, 
         return std::nullopt;
     }
     const ByteView data = ByteReader(superblob).sub(entry.offset, length, "blob").bytes(length, "blob");
-
-    BlobRecord record;
-    record.emplace(kSlotTypeKey, entry.slotType);
-    record.emplace(kBlobOffsetKey, entry.offset);
-    record.emplace(kBlobLengthKey, length);
-    record.emplace(kBlobDataKey, foundation::toData(data));
-    record.emplace(kBlobMagicKey, magic);
-    return record;
+    return BlobRecord{entry.slotType, entry.offset, magic, data};
 }
 
-const foundation::Value& valueOf(const BlobRecord& record, std::string_view key) {
-    return record.find(key)->second;  // a record has all of its keys
+/// What a ticket adds to the index and to the blobs.
+constexpr std::uint64_t kTicketFootprint = kBlobIndexEntrySize + kBlobHeaderSize;
+
+BlobSet withoutTickets(const BlobSet& blobs) {
+    BlobSet kept;
+    kept.reserve(blobs.size());
+    std::copy_if(blobs.begin(), blobs.end(), std::back_inserter(kept),
+                 [](const BlobRecord& record) { return record.slotType != kTicketSlotType; });
+    return kept;
+}
+
+/// Of the superblob that these blobs, none of them a ticket, and the ticket make.
+std::uint64_t lengthWith(const BlobSet& kept, ByteView ticket) {
+    std::uint64_t length = kSuperblobHeaderSize;
+    for (const BlobRecord& record : kept) length += kBlobIndexEntrySize + record.length();
+    return ticket.empty() ? length : length + kTicketFootprint + ticket.size();
 }
 
 }  // namespace
 
-std::uint32_t slotTypeOf(const BlobRecord& record) {
-    return static_cast<std::uint32_t>(valueOf(record, kSlotTypeKey).unsignedIntegerValue());
+foundation::Value BlobRecord::at(std::string_view key) const {
+    if (key == kSlotTypeKey) return slotType;
+    if (key == kBlobOffsetKey) return offset;
+    if (key == kBlobLengthKey) return length();
+    if (key == kBlobDataKey) return foundation::toData(data);
+    if (key == kBlobMagicKey) return magic;
+    return {};
 }
 
-std::uint32_t blobOffsetOf(const BlobRecord& record) {
-    return static_cast<std::uint32_t>(valueOf(record, kBlobOffsetKey).unsignedIntegerValue());
-}
-
-std::uint64_t lengthOf(const BlobRecord& record) {
-    return valueOf(record, kBlobLengthKey).unsignedIntegerValue();
-}
-
-std::uint32_t blobMagicOf(const BlobRecord& record) {
-    return static_cast<std::uint32_t>(valueOf(record, kBlobMagicKey).unsignedIntegerValue());
-}
-
-ByteView dataOf(const BlobRecord& record) {
-    return *valueOf(record, kBlobDataKey).data();
+bool operator==(const BlobRecord& a, const BlobRecord& b) {
+    return a.slotType == b.slotType && a.offset == b.offset && a.magic == b.magic &&
+           std::ranges::equal(a.data, b.data);
 }
 
 std::string_view slotName(std::uint32_t slot) {
@@ -117,22 +126,22 @@ std::string_view slotName(std::uint32_t slot) {
 }
 
 std::optional<BlobSet> orderedBlobSetForSuperBlob(ByteView superblob, std::uint32_t numberOfBlobs) {
-    if (numberOfBlobs > codesign::kMaximumBlobCount) return std::nullopt;
     const std::vector<IndexEntry> index = readIndex(superblob, numberOfBlobs);
-    if (index.size() < numberOfBlobs) {
+    if (index.size() < numberOfBlobs || hasEqualEntries(index)) {
         NoisyLog("Did not find %d unique blobs in the code signing data.", numberOfBlobs);
         return std::nullopt;
     }
 
     BlobSet blobs;
+    blobs.reserve(index.size());
     std::uint64_t covered = kSuperblobHeaderSize + std::uint64_t{kBlobIndexEntrySize} * numberOfBlobs;
     try {
         for (std::size_t i = 0; i < index.size(); ++i) {
             const std::uint64_t end = i + 1 < index.size() ? index[i + 1].offset : superblob.size();
-            auto record = readBlob(superblob, index[i], end);
+            const auto record = readBlob(superblob, index[i], end);
             if (!record) break;
-            covered += lengthOf(*record);
-            blobs.push_back(std::move(*record));
+            covered += record->length();
+            blobs.push_back(*record);
         }
     } catch (const ShortRead&) {
         // Ends the search as a wrong length does; what is not covered tells.
@@ -151,43 +160,40 @@ Data emptySuperblob() {
     return ByteWriter().be32(kSuperblobMagic).be32(kSuperblobHeaderSize).be32(0).data();
 }
 
-Data superblobWithTicket(const BlobSet& blobs, ByteView ticket) {
-    BlobSet kept;
-    std::copy_if(blobs.begin(), blobs.end(), std::back_inserter(kept),
-                 [](const BlobRecord& record) { return slotTypeOf(record) != kTicketSlotType; });
-    const std::size_t count = kept.size() + (ticket.empty() ? 0 : 1);
-    NoisyLog("Adding %lu blobs to superblob. What about Blob?", count);
-
-    ByteWriter index;
-    ByteWriter area;
-    auto offset = static_cast<std::uint32_t>(kSuperblobHeaderSize + kBlobIndexEntrySize * count);
-    for (const BlobRecord& record : kept) {
-        index.be32(slotTypeOf(record)).be32(offset);
-        NoisyLog("Adding blob of size %@ to offset %d.", valueOf(record, kBlobLengthKey), offset);
-        area.bytes(dataOf(record));
-        offset += static_cast<std::uint32_t>(lengthOf(record));
-    }
-    if (!ticket.empty()) {
-        index.be32(kTicketSlotType).be32(offset);
-        const auto length = static_cast<std::uint32_t>(ticket.size() + kBlobHeaderSize);
-        area.be32(kTicketBlobMagic).be32(length).bytes(ticket);
-        NoisyLog("Length of new ticket blob is %tu", ticket.size() + kBlobHeaderSize);
-        offset += length;
-    }
-    if (index.size() == 0 || area.size() == 0) return {};
-
-    ByteWriter superblob;
-    superblob.be32(kSuperblobMagic).be32(offset).be32(static_cast<std::uint32_t>(count));
-    superblob.bytes(index.data()).bytes(area.data());
-    return std::move(superblob).take();
+bool hasRoomForTicket(const BlobSet& blobs, ByteView ticket) {
+    return lengthWith(withoutTickets(blobs), ticket) <= std::numeric_limits<std::uint32_t>::max();
 }
 
-bool isReadableSuperblob(ByteView superblob) {
-    if (superblob.empty()) return true;
-    ByteReader reader(superblob);
-    reader.skip(8, "superblob magic and length");
-    return reader.be32("superblob count") <= codesign::kMaximumBlobCount &&
-           superblob.size() <= codesign::kMaximumSuperBlobLength;
+SparseBuffer superblobWithTicket(const BlobSet& blobs, ByteView ticket, std::size_t spare) {
+    const BlobSet kept = withoutTickets(blobs);
+    const std::size_t count = kept.size() + (ticket.empty() ? 0 : 1);
+    NoisyLog("Adding %lu blobs to superblob. What about Blob?", count);
+    const std::uint64_t length = lengthWith(kept, ticket);
+    const std::uint64_t area = kSuperblobHeaderSize + std::uint64_t{kBlobIndexEntrySize} * count;
+    if (length == area) return {};
+
+    SparseBuffer superblob(length + spare);
+    ByteWriter start;
+    start.be32(kSuperblobMagic)
+        .be32(static_cast<std::uint32_t>(length))
+        .be32(static_cast<std::uint32_t>(count));
+    auto offset = static_cast<std::uint32_t>(area);
+    for (const BlobRecord& record : kept) {
+        start.be32(record.slotType).be32(offset);
+        NoisyLog("Adding blob of size %@ to offset %d.", record.at(kBlobLengthKey), offset);
+        superblob.put(offset, record.data);
+        offset += static_cast<std::uint32_t>(record.length());
+    }
+    if (!ticket.empty()) {
+        start.be32(kTicketSlotType).be32(offset);
+        const std::size_t blobLength = ticket.size() + kBlobHeaderSize;
+        superblob.put(
+            offset, ByteWriter().be32(kTicketBlobMagic).be32(static_cast<std::uint32_t>(blobLength)).data());
+        superblob.put(offset + kBlobHeaderSize, ticket);
+        NoisyLog("Length of new ticket blob is %tu", blobLength);
+    }
+    superblob.put(0, start.data());
+    return superblob;
 }
 
 }  // namespace pinwell

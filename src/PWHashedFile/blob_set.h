@@ -11,9 +11,8 @@
 //
 // Stricter than what the code-signing service reads, since the parts are to be written back: the blobs follow
 // the index at once, in index order, back to back, and the last one ends where the superblob ends. Refused
-// besides: two equal index entries, and whatever exceeds the limits of the code-signing service
-// (codesign/code_signing.h): a length is a claim of the file, with nothing behind it where the file is
-// sparse, and a record takes fifty times what the smallest blob does. No blob is looked into.
+// besides: two equal index entries. No blob is looked into. There is no limit on the length or on the number
+// of blobs: a record is a view, and takes no more than twice what the smallest blob and its index entry do.
 #pragma once
 
 #include <cstdint>
@@ -22,6 +21,7 @@
 #include <vector>
 
 #include "foundation/bytes.h"
+#include "foundation/sparse_bytes.h"
 #include "foundation/value.h"
 
 namespace pinwell {
@@ -45,33 +45,42 @@ inline constexpr std::string_view kBlobLengthKey = "length";      // number: fro
 inline constexpr std::string_view kBlobDataKey = "data";          // byte buffer, with the blob's header
 inline constexpr std::string_view kBlobMagicKey = "magic";        // number, 32 bits
 
-/// One blob: exactly the five keys above. Copies share the bytes.
-using BlobRecord = foundation::Dictionary;
+/// One blob, as a view of its superblob. Reads as a dictionary of exactly the five keys above.
+struct BlobRecord {
+    std::uint32_t slotType = 0;
+    std::uint32_t offset = 0;
+    std::uint32_t magic = 0;
+    foundation::ByteView data;  // with the blob's header
+
+    std::uint64_t length() const noexcept { return data.size(); }
+
+    /// The value of one of the five keys; null for any other.
+    foundation::Value at(std::string_view key) const;
+
+    /// Whether all keys have equal values.
+    friend bool operator==(const BlobRecord& a, const BlobRecord& b);
+};
 
 /// Records in index order, no two of them equal.
 using BlobSet = std::vector<BlobRecord>;
 
-std::uint32_t slotTypeOf(const BlobRecord& record);
-std::uint32_t blobOffsetOf(const BlobRecord& record);
-std::uint64_t lengthOf(const BlobRecord& record);
-std::uint32_t blobMagicOf(const BlobRecord& record);
-foundation::ByteView dataOf(const BlobRecord& record);
-
-/// The blobs of a whole superblob that says it has `numberOfBlobs`. Nothing when index entries are missing or
-/// equal, or when the blobs do not fill the superblob; fewer records than `numberOfBlobs` when a blob's own
-/// length is wrong and the others fill it all the same.
+/// The blobs of a whole superblob that says it has `numberOfBlobs`, as views of it. Nothing when index
+/// entries are missing or equal, or when the blobs do not fill the superblob; fewer records than
+/// `numberOfBlobs` when a blob's own length is wrong and the others fill it all the same.
 std::optional<BlobSet> orderedBlobSetForSuperBlob(foundation::ByteView superblob,
                                                   std::uint32_t numberOfBlobs);
 
 /// What stands in for a missing signature: a header that counts no blobs.
 foundation::Data emptySuperblob();
 
-/// The superblob of all of `blobs` that are no ticket, followed by `ticket` in a blob of its own unless it is
-/// empty. Empty when that leaves no blob at all. `ticket` is shorter than 4 GiB.
-foundation::Data superblobWithTicket(const BlobSet& blobs, foundation::ByteView ticket);
+/// Whether the superblob of superblobWithTicket would have a length of 32 bits, which is all that its header
+/// has room for.
+bool hasRoomForTicket(const BlobSet& blobs, foundation::ByteView ticket);
 
-/// Whether a superblob made by superblobWithTicket keeps within the limits of those who read it: one more
-/// blob, in an image at a limit, would be one too many for ever after.
-bool isReadableSuperblob(foundation::ByteView superblob);
+/// The superblob of all of `blobs` that are no ticket, followed by `ticket` in a blob of its own unless it is
+/// empty, and by `spare` zero bytes for what the caller puts behind it. Empty when that leaves no blob at
+/// all. hasRoomForTicket must hold. Throws std::bad_alloc.
+foundation::SparseBuffer superblobWithTicket(const BlobSet& blobs, foundation::ByteView ticket,
+                                             std::size_t spare = 0);
 
 }  // namespace pinwell

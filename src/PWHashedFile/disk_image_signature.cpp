@@ -4,7 +4,6 @@
 #include <array>
 #include <limits>
 
-#include "codesign/code_signing.h"
 #include "foundation/byte_reader.h"
 #include "foundation/process.h"
 #include "src/messages.h"
@@ -84,24 +83,23 @@ bool readDiskImageSuperblob(files::FileReader& file, const std::string& name, di
             end, trailerStart);
         return into.refuse(fields, "the signature does not end where the trailer begins");
     }
-    if (into.csLength > codesign::kMaximumSuperBlobLength)
-        return into.refuse(fields, "the signature is too long");
+    const bool canBeSaid = into.csLength <= std::numeric_limits<std::uint32_t>::max();
+    const std::uint64_t wanted = canBeSaid ? into.csLength : kSuperblobHeaderSize;
     attempt(
         [&] {
             file.seek(into.csStart);
-            into.superblob = file.read(into.csLength);
+            into.superblob = files::readShared(file, wanted);
         },
         [&](const char* reason) {
             NoisyLog("Could read code signature header of %@. This should not have happened. %@", name,
                      reason);
         });
-    return into.superblob.size() == into.csLength ||
-           into.refuse(into.csStart, "the signature cannot be read");
+    return into.superblob.size() == wanted || into.refuse(into.csStart, "the signature cannot be read");
 }
 
 bool readDiskImageBlobs(const std::string& name, disk_image_signature& into) {
     std::array<std::byte, kSuperblobHeaderSize> header{};  // of a shorter superblob the rest is zero
-    const ByteView start = ByteView(into.superblob).first(std::min(into.superblob.size(), header.size()));
+    const ByteView start = into.superblob.view().first(std::min(into.superblob.size(), header.size()));
     std::copy(start.begin(), start.end(), header.begin());
     ByteReader reader(header);
     if (reader.be32("superblob magic") != kSuperblobMagic) {
@@ -131,14 +129,13 @@ bool readDiskImageBlobs(const std::string& name, disk_image_signature& into) {
 
 const BlobRecord* ticketBlobOf(const BlobSet& blobs) {
     const auto found = std::find_if(blobs.rbegin(), blobs.rend(), [](const BlobRecord& record) {
-        return slotTypeOf(record) == kTicketSlotType;
+        return record.slotType == kTicketSlotType;
     });
     return found == blobs.rend() ? nullptr : &*found;
 }
 
 ByteView ticketIn(const BlobRecord& blob) {
-    const ByteView whole = dataOf(blob);
-    return whole.subspan(std::min<std::size_t>(kBlobHeaderSize, whole.size()));
+    return blob.data.subspan(std::min<std::size_t>(kBlobHeaderSize, blob.data.size()));
 }
 
 }  // namespace pinwell

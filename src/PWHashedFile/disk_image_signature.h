@@ -29,9 +29,9 @@ struct disk_image_signature {
     std::uint64_t fileSize = 0;
     std::uint64_t csStart = 0;
     std::uint64_t csLength = 0;
-    foundation::Data superblob;
+    foundation::SharedBytes superblob;
     std::uint32_t numBlobs = 0;  // as stated
-    BlobSet blobs;
+    BlobSet blobs;               // views of the superblob
 
     /// Why these are not a disk image's, and where in the file.
     std::optional<ticket_fault> fault;
@@ -46,7 +46,8 @@ struct disk_image_signature {
 /// Reads the trailer: what kind of file it is, and where the superblob stands. `name` is for the messages.
 bool readDiskImageTrailer(files::FileReader& file, const std::string& name, disk_image_signature& into);
 
-/// Reads the superblob of a signed image, whole.
+/// Reads the superblob of a signed image, whole: memory is taken for what is there, not for holes and zeros.
+/// One that is longer than its own length field can say is left after its header, by which it is refused.
 bool readDiskImageSuperblob(files::FileReader& file, const std::string& name, disk_image_signature& into);
 
 /// Takes the superblob apart.

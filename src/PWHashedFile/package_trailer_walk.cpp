@@ -1,8 +1,12 @@
 #include "src/PWHashedFile/package_trailer_walk.h"
 
 #include <algorithm>
+#include <iterator>
 #include <utility>
+#include <vector>
 
+#include "src/PWHashedFile/held_ticket.h"
+#include "src/PWHashedFile/trailer_window.h"
 #include "src/messages.h"
 
 namespace pinwell {
@@ -10,35 +14,56 @@ namespace {
 
 using files::FileHandleError;
 using files::FileReader;
-using foundation::ByteView;
 using foundation::Data;
+using foundation::SharedBytes;
+using foundation::SparseBuffer;
 
-// What is met on the way backwards through a file. It is kept back to front, so that to put something in
-// front is to append: a chain of a million empty trailers costs no more than its length.
+// What is met on the way backwards through a file, as pieces that are back to front. Short ones share a
+// buffer in which the bytes are back to front as well, so that to put something in front is to append.
 class BackwardCollection {
   public:
-    void putInFront(ByteView bytes) { reversed_.insert(reversed_.end(), bytes.rbegin(), bytes.rend()); }
-    void clear() { reversed_.clear(); }
-    std::size_t size() const { return reversed_.size(); }
+    void putInFront(SharedBytes bytes) {
+        size_ += bytes.size();
+        if (bytes.size() <= kShort) {
+            reversed_.insert(reversed_.end(), std::make_reverse_iterator(bytes.end()),
+                             std::make_reverse_iterator(bytes.begin()));
+        } else {
+            closeBuffer();
+            pieces_.push_back(std::move(bytes));
+        }
+    }
+    void clear() { *this = {}; }
+    std::uint64_t size() const { return size_; }
 
-    Data inFileOrder() && {
-        std::reverse(reversed_.begin(), reversed_.end());
-        return std::move(reversed_);
+    SharedBytes inFileOrder() && {
+        closeBuffer();
+        if (pieces_.size() == 1) return pieces_.front();
+        SparseBuffer whole(size_);
+        for (std::size_t offset = 0; !pieces_.empty(); pieces_.pop_back()) {
+            whole.put(offset, pieces_.back());
+            offset += pieces_.back().size();
+        }
+        return whole;
     }
 
   private:
-    Data reversed_;
-};
+    static constexpr std::size_t kShort = TrailerWindow::kSize;
 
-Data readAt(FileReader& file, std::uint64_t offset, std::uint64_t length) {
-    file.seek(offset);
-    return file.read(length);
-}
+    void closeBuffer() {
+        if (reversed_.empty()) return;
+        std::reverse(reversed_.begin(), reversed_.end());
+        pieces_.emplace_back(std::exchange(reversed_, {}));
+    }
+
+    std::vector<SharedBytes> pieces_;
+    Data reversed_;
+    std::uint64_t size_ = 0;
+};
 
 class Walk {
   public:
     Walk(FileReader& file, const std::string& name, const TrailerVisitor& visit)
-        : file_(file), name_(name), visit_(visit) {}
+        : file_(file), window_(file), name_(name), visit_(visit) {}
 
     package_trailers run() {
         if (readSize()) readTrailers();
@@ -84,7 +109,7 @@ class Walk {
         }
         const std::uint64_t recordOffset = position - kTrailerSize;
         trailer_header record;
-        if (!trailer_data_is_valid(readAt(file_, recordOffset, kTrailerSize), &record)) return std::nullopt;
+        if (!trailer_data_is_valid(window_.readAt(recordOffset, kTrailerSize), &record)) return std::nullopt;
         if (visit_) visit_(recordOffset, record);
         if (trailer_is_terminator(record.firstWord(), record.length())) {
             found_.hasTrailers = found_.hasTerminator = true;
@@ -110,38 +135,36 @@ class Walk {
         return start;
     }
 
+    SharedBytes readAt(std::uint64_t start, std::uint64_t length) {
+        if (length <= TrailerWindow::kSize) return foundation::toData(window_.readAt(start, length));
+        file_.seek(start);
+        return files::readShared(file_, length);
+    }
+
     void collect(const trailer_header& record, std::uint64_t start, std::uint64_t total) {
         NoisyLog("Found unknown trailer type %d. Adding %llu bytes to append.", record.type(), total);
-        mustNotExceed(kMaximumUnknownTrailers, unknown_.size() + total);
-        const Data trailer = readAt(file_, start, total);
+        SharedBytes trailer = readAt(start, total);
         if (trailer.size() != total)
             NoisyLog("Data read for unknown trailer does not match expected size. %lu vs %llu.",
                      trailer.size(), total);
-        unknown_.putInFront(trailer);
+        unknown_.putInFront(std::move(trailer));
     }
 
     void readTicket(std::uint64_t start, std::uint32_t length) {
         NoisyLog("Found expected ticket at %llu with length of %d", start, length);
         try {
-            mustNotExceed(kMaximumTicket, length);
-            found_.ticket = readAt(file_, start, length);
+            found_.ticket = foundation::toData(readAt(start, heldOfTicket(length)).view());
             found_.ticketStart = start;
             found_.ticketLength = length;
         } catch (const FileHandleError& failure) {
             NoisyLog("Couldn't read existing ticket of %@. %@.", name_, failure.what());
-            refuse(start, length > kMaximumTicket ? "the ticket is too long to be read"
-                                                  : "the ticket cannot be read");
+            refuse(start, "the ticket cannot be read");
             unknown_.clear();
         }
     }
 
-    void mustNotExceed(std::uint64_t limit, std::uint64_t length) {
-        if (length <= limit) return;
-        found_.exceedsLimits = true;
-        throw FileHandleError(foundation::format("More than %llu bytes are not read", limit));
-    }
-
     FileReader& file_;
+    TrailerWindow window_;
     const std::string& name_;
     const TrailerVisitor& visit_;
     BackwardCollection unknown_;

@@ -20,17 +20,17 @@
 //
 // Errors. Bad input is an answer and never an exception: a `Result` holds an `Error` in place of its value, a
 // `Validation` says what is wrong. std::bad_alloc is the one exception that leaves the library; no allocation
-// is sized by a number from the input, so it takes an input that is really that large. The longest that is
-// read: a superblob of 128 MiB, a package's ticket of 64 MiB, 16 MiB of other trailers, a payload of 16 MiB.
-// Messages are one line, in English, for people; programs go by the codes. Text in them that comes from the
-// input, such as the name of a certificate, has its control characters escaped.
+// is sized by a number from the input, so it takes an input that is really that large. The longest ticket
+// that is handed out has 64 MiB, the longest payload 16 MiB; superblobs and other trailers may have any
+// length. Messages are one line, in English, for people; programs go by the codes. Text in them that comes
+// from the input, such as the name of a certificate, has its control characters escaped.
 //
 // Threads. The library keeps no state that can be seen; every function may be called from any number of
 // threads at once, and so may the members of one object that are const. It prints nothing, goes by no
 // environment variable (libcrypto, which it uses, has its own), and touches no file but those it is given.
-// It stays loaded after dlclose(). One exception, which the tool makes as well: validate() asks the dynamic loader for
-// libostrelsecurity.so.1, and goes by the ticket-signing policy of that library where there is one (its
-// interface is <pinwell/ostrel_security.h>); it is loaded into the process.
+// It stays loaded after dlclose(). One exception, which the tool makes as well: validate() asks the dynamic
+// loader for libostrelsecurity.so.1, and goes by the ticket-signing policy of that library where there is one
+// (its interface is <pinwell/ostrel_security.h>); it is loaded into the process.
 //
 // Versions. PINWELL_TICKET_VERSION is the version of this interface; it goes with the library's name,
 // libpinwell-ticket.so.0. As long as that name stays, what is declared here stays as it is, in meaning and in
@@ -230,7 +230,7 @@ struct DiskImage {
     std::uint64_t fileSize = 0;
     Range trailer;                      // the last 512 bytes
     std::optional<Range> superblob;     // nothing: the image is not signed
-    std::vector<Slot> slots;            // in the order of the index, at most 65536
+    std::vector<Slot> slots;            // in the order of the index
     std::optional<FoundTicket> ticket;  // the last one, should there be several
 };
 

@@ -13,7 +13,7 @@
 namespace pinwell::test {
 namespace {
 
-TEST(BoundedWork, EveryTrailerIsReadTwiceAtMost) {
+TEST(BoundedWork, ManyTrailersAreReadInAFewPieces) {
     constexpr std::size_t kTrailers = 10'000;
     PackageBuilder builder;
     builder.terminator();
@@ -25,7 +25,7 @@ TEST(BoundedWork, EveryTrailerIsReadTwiceAtMost) {
     EXPECT_EQ(package._ticketData(), std::nullopt);
     ASSERT_TRUE(package.dataToAppend());
     EXPECT_EQ(package.dataToAppend()->size(), kTrailers * kTrailerSize);
-    EXPECT_LE(platform.files.count("handle.read"), 2 * (kTrailers + 1));
+    EXPECT_LE(platform.files.count("handle.read"), 16U);
 }
 
 TEST(BoundedWork, TrailersThatClaimMoreThanTheFileAreNotRead) {

@@ -200,7 +200,7 @@ TEST(CodeDirectory, EndsCleanlyWhereverItIsCut) {
     const Data whole =
         CodeDirectoryBuilder().version(0x20500).team("TEAM").covers(2, emptyRequirements()).build();
     for (std::size_t length = 0; length < whole.size(); ++length) {
-        EXPECT_ANY_THROW(CodeDirectory::parse(ByteView(whole).first(length))) << length;
+        EXPECT_ANY_THROW(CodeDirectory::parse(foundation::toData(ByteView(whole).first(length)))) << length;
     }
 }
 

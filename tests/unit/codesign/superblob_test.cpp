@@ -2,15 +2,20 @@
 
 #include <gtest/gtest.h>
 
+#include <filesystem>
+
 #include "codesign/code_error.h"
 #include "foundation/byte_reader.h"
 #include "foundation/byte_writer.h"
 #include "support/code_directory_builder.h"
+#include "support/resident_memory.h"
+#include "support/temporary_directory.h"
 
 namespace pinwell::test {
 namespace {
 
 using codesign::CodeError;
+using codesign::FileSource;
 using codesign::MemorySource;
 using codesign::parseSuperBlob;
 using codesign::readSuperBlob;
@@ -81,18 +86,18 @@ TEST(SuperBlob, RefusesALengthThatCutsABlob) {
     EXPECT_THROW(parseSuperBlob(threeBlobs().length(size - 1).build()), ShortRead);
 }
 
-TEST(SuperBlob, RefusesALengthBeyondTheLimit) {
-    EXPECT_THROW(parseSuperBlob(threeBlobs().length(codesign::kMaximumSuperBlobLength + 1).build()),
-                 CodeError);
-}
-
 TEST(SuperBlob, RefusesACountBeyondTheBytes) {
     EXPECT_THROW(parseSuperBlob(SuperBlobBuilder().count(1).build()), ShortRead);
 }
 
-TEST(SuperBlob, RefusesACountBeyondTheLimit) {
-    EXPECT_THROW(parseSuperBlob(threeBlobs().count(codesign::kMaximumBlobCount + 1).build()), CodeError);
-    EXPECT_THROW(parseSuperBlob(threeBlobs().count(0xFFFFFFFF).build()), CodeError);
+TEST(SuperBlob, RefusesACountBeyondTheBytesThoughNoBlobIsMissing) {
+    EXPECT_THROW(parseSuperBlob(threeBlobs().count(0xFFFFFFFF).build()), ShortRead);
+}
+
+TEST(SuperBlob, HasMoreBlobsThan16BitsCount) {
+    SuperBlobBuilder builder;
+    for (std::uint32_t i = 0; i < 70'000; ++i) builder.blob(0x20000 + i, makeBlob(0xA0, {}));
+    EXPECT_EQ(parseSuperBlob(builder.build()).size(), 70'000U);
 }
 
 TEST(SuperBlob, RefusesABlobThatBeginsBeyondTheEnd) {
@@ -171,11 +176,18 @@ TEST(SuperBlobInAFile, RefusesAnAreaBeyondTheFile) {
     EXPECT_THROW(readSuperBlob(MemorySource(Data(100)), 0xFFFFFFFFFFFFFFFF, 12), CodeError);
 }
 
-TEST(SuperBlobInAFile, IsNotReadWhenItClaimsToBeTooLong) {
-    Data file = threeBlobs().length(codesign::kMaximumSuperBlobLength + 1).build();
-    file.resize(codesign::kMaximumSuperBlobLength + 4096);
-    const MemorySource source(std::move(file));
-    EXPECT_THROW(readSuperBlob(source, 0, source.size()), CodeError);
+// A file of zeros behind the blobs.
+TEST(SuperBlobInAFile, TakesMemoryForWhatIsThereWhateverItsLength) {
+    const TemporaryDirectory directory;
+    const std::string path = directory / "signed";
+    writeFile(path, ByteView(threeBlobs().length(0xFFFFFFFF).build()));
+    std::filesystem::resize_file(path, 0xFFFFFFFF);
+    const FileSource source(foundation::Places(), path);
+    const std::size_t before = residentMemory();
+    const foundation::SharedBytes superblob = readSuperBlob(source, 0, source.size());
+    EXPECT_EQ(superblob.size(), 0xFFFFFFFF);
+    EXPECT_EQ(parseSuperBlob(superblob).size(), 3U);
+    EXPECT_LE(residentMemory(), before + kLittleMemory);
 }
 
 TEST(BuiltSuperBlob, IsReadBack) {

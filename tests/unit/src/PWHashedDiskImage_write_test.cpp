@@ -4,12 +4,14 @@
 #include <algorithm>
 #include <cerrno>
 #include <filesystem>
+#include <fstream>
 
 #include "disk_image_fixture.h"
 #include "foundation/byte_writer.h"
 #include "foundation/bytes.h"
 #include "foundation/url.h"
 #include "foundation/value.h"
+#include "support/resident_memory.h"
 
 namespace pinwell {
 namespace {
@@ -75,26 +77,63 @@ class DiskImageWriting : public test::DiskImageTest {
     Data header;
 };
 
-TEST_F(DiskImageWriting, AddsNoBlobToAnImageThatHasTheMostOfThem) {
+TEST_F(DiskImageWriting, AddsATicketToMoreBlobsThan16BitsCount) {
     SuperBlobBuilder superblob = DiskImageBuilder::signature();
-    for (std::uint32_t i = 3; i < codesign::kMaximumBlobCount; ++i)
-        superblob.blob(0x20000 + i, makeBlob(0xFADE7171, {}));
-    const DiskImageBuilder before = DiskImageBuilder().superblob(superblob);
-    EXPECT_FALSE(write(before, "TICKET"));
-    expectFailedWith73AndUntouched(before);
-    EXPECT_EQ(
-        lines.back().find("Cannot add a new ticket to image.dmg. Error Domain=POSIXErrorDomain Code=27 "),
-        0U);
-    ASSERT_TRUE(error);
-    EXPECT_EQ(error->code(), EFBIG);
+    for (std::uint32_t i = 3; i < 70'000; ++i) superblob.blob(0x20000 + i, makeBlob(0xFADE7171, {}));
+    ASSERT_TRUE(write(DiskImageBuilder().superblob(superblob), "TICKET"));
+    EXPECT_TRUE(contents() ==
+                contentsOf(DiskImageBuilder().superblob(superblob.blob(0x10002, ticketBlob("TICKET")))));
 }
 
-TEST_F(DiskImageWriting, AddsNoTicketThatMakesTheSuperblobTooLong) {
-    const auto filler = foundation::Data(codesign::kMaximumSuperBlobLength - 1000, std::byte{0});
-    const DiskImageBuilder before = DiskImageBuilder().superblob(
-        DiskImageBuilder::signature().blob(0x20000, makeBlob(0xFADE7171, filler)));
-    EXPECT_FALSE(write(before, std::string(1000, 't')));
-    expectFailedWith73AndUntouched(before);
+// An image of 1000 bytes of data, this superblob with zeros behind it up to `length`, and the trailer.
+class LargeDiskImageWriting : public DiskImageWriting {
+  protected:
+    void putSparse(std::uint64_t length, const SuperBlobBuilder& superblob) {
+        Data start(1000, std::byte{0xDA});
+        foundation::append(start, superblob.build());
+        test::writeFile(path, foundation::ByteView(start));
+        std::filesystem::resize_file(path, 1000 + length);
+        std::ofstream(path, std::ios::binary | std::ios::app)
+            << foundation::toString(DiskImageBuilder().codeSignOffset(1000).codeSignLength(length).trailer());
+        test::writeFile(source.path(), std::string_view("TICKET"));
+    }
+    static SuperBlobBuilder signatureThatEndsIn(std::uint32_t slot, std::uint32_t length) {
+        const auto before = static_cast<std::uint32_t>(DiskImageBuilder::signature().build().size() + 8);
+        return DiskImageBuilder::signature()
+            .blob(slot, ByteWriter().be32(0xFADE7171).be32(length - before).data())
+            .length(length);
+    }
+};
+
+TEST_F(LargeDiskImageWriting, AddsATicketToASuperblobOf200Mebibytes) {
+    constexpr std::uint32_t kLength = 200U * 1024 * 1024;
+    putSparse(kLength, signatureThatEndsIn(0x20000, kLength));
+    const std::size_t before = test::residentMemory();
+    auto image = open();
+    EXPECT_TRUE(image._writeNewTicketDataFromURL(source, url, false, &error));
+    EXPECT_LE(test::residentMemory(), before + test::kLittleMemory);
+    EXPECT_EQ(std::filesystem::file_size(path), 1000 + kLength + 8 + 8 + 6 + 512);
+    auto again = open();
+    EXPECT_EQ(again.appropriateExitCode(), 0);
+    EXPECT_EQ(again.blobs().size(), 5U);
+    EXPECT_EQ(again._ticketData(), foundation::toData("TICKET"));
+}
+
+TEST_F(LargeDiskImageWriting, ReplacesAStaleTicketOf200Mebibytes) {
+    constexpr std::uint32_t kLength = 200U * 1024 * 1024;
+    putSparse(kLength, signatureThatEndsIn(0x10002, kLength));
+    EXPECT_TRUE(open()._writeNewTicketDataFromURL(source, url, false, &error));
+    EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(signedAndStapled("TICKET"))));
+}
+
+TEST_F(LargeDiskImageWriting, AddsNoTicketThatMakesTheSuperblobsLengthOverflow) {
+    putSparse(0xFFFFFFFF, signatureThatEndsIn(0x20000, 0xFFFFFFFF));
+    auto image = open();
+    EXPECT_FALSE(image._writeNewTicketDataFromURL(source, url, false, &error));
+    EXPECT_EQ(image.appropriateExitCode(), 73);
+    EXPECT_TRUE(platform.files.changes().empty());
+    ASSERT_TRUE(error);
+    EXPECT_EQ(error->code(), EFBIG);
 }
 
 TEST_F(DiskImageWriting, PutsASuperblobOf28BytesAndTheTicketInFrontOfAnUnsignedImagesTrailer) {
@@ -122,7 +161,7 @@ TEST_F(DiskImageWriting, AppendsTheTicketToASignedImagesBlobsWhichMoveBy8) {
     ASSERT_TRUE(write(DiskImageBuilder().superblob(before), "TICKET"));
     EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(signedAndStapled("TICKET"))));
     EXPECT_EQ(contents().size(), 1000 + before.size() + 8 + 14 + 512);
-    EXPECT_EQ(slotTypeOf(open().blobs().back()), 0x10002U);
+    EXPECT_EQ(open().blobs().back().slotType, 0x10002U);
     EXPECT_EQ(open().blobs()[0].at("offset"), foundation::Value(44U));
     EXPECT_FALSE(printedTruncation());
 }

@@ -5,6 +5,7 @@
 
 #include "foundation/url.h"
 #include "package_fixture.h"
+#include "src/PWHashedFile/held_ticket.h"
 #include "src/PWHashedFile/package_trailer_walk.h"
 #include "support/archive_builder.h"
 
@@ -49,30 +50,24 @@ TEST_F(FlatPackageWriting, TheFirstStapleAppendsTerminatorTicketAndRecord) {
     EXPECT_EQ(package.ticketStart(), PackageBuilder().archiveSize() + 16);
 }
 
-TEST_F(FlatPackageWriting, BehindTrailersThatAreTooManyToBeReadNothingIsWritten) {
-    const std::string large(kMaximumUnknownTrailers, 'x');
-    for (const PackageBuilder& before : {PackageBuilder().terminator().ticket("OLD").unknown(large),
-                                         PackageBuilder().terminator().unknown(large)}) {
-        put(before);
-        PWHashedFlatPackage fresh(url, platform.services());
-        const MessageCapture output(kVerbosityVerbose);
-        EXPECT_FALSE(fresh.writeNewTicketDataFromURL(source, nullptr));
-        EXPECT_EQ(fresh.appropriateExitCode(), 73);
-        EXPECT_THAT(
-            output.lines().back(),
-            StartsWith("Cannot add a new ticket to Sample.pkg. Error Domain=POSIXErrorDomain Code=27 "));
-        EXPECT_TRUE(contents() == before.build());
-        EXPECT_THAT(platform.files.changes(), IsEmpty());
-    }
+TEST_F(FlatPackageWriting, TrailersOfAnyLengthMoveInFrontOfTheNewTicket) {
+    const std::string large(std::size_t{20} * 1024 * 1024, 'x');
+    put(PackageBuilder().terminator().ticket("OLD").unknown(large).unknown("one"));
+    EXPECT_TRUE(staple());
+    EXPECT_TRUE(contents() ==
+                PackageBuilder().terminator().unknown(large).unknown("one").ticket("NEW TICKET").build());
 }
 
-TEST_F(FlatPackageWriting, OverATicketThatIsTooLongToBeReadNothingIsWritten) {
-    const PackageBuilder before = PackageBuilder().terminator().ticket(std::string(kMaximumTicket + 1, 'x'));
-    put(before);
-    EXPECT_FALSE(staple());
-    EXPECT_EQ(package.appropriateExitCode(), 73);
-    EXPECT_TRUE(contents() == before.build());
-    EXPECT_THAT(platform.files.changes(), IsEmpty());
+TEST_F(FlatPackageWriting, AStaleTicketOfAnyLengthIsReplaced) {
+    put(PackageBuilder().terminator().ticket(std::string(kLongestTicketHeld + 1, 'x')).unknown("one"));
+    EXPECT_TRUE(staple());
+    EXPECT_TRUE(contents() == PackageBuilder().terminator().unknown("one").ticket("NEW TICKET").build());
+}
+
+TEST_F(FlatPackageWriting, AStaleTicketOfAnyLengthIsDeleted) {
+    put(PackageBuilder().terminator().ticket(std::string(kLongestTicketHeld + 1, 'x')));
+    EXPECT_TRUE(unstaple());
+    EXPECT_TRUE(contents() == PackageBuilder().terminator().build());
 }
 
 TEST_F(FlatPackageWriting, AnEmptyFileIsStapledLikeAnyOther) {
@@ -381,15 +376,21 @@ TEST_F(FlatPackageWriting, NothingIsSavedWhereACloneIsWritten) {
     EXPECT_EQ(contents(), before);
 }
 
-TEST_F(FlatPackageWriting, TrailersThatCannotBeSavedAreNotMoved) {
-    const std::string before = PackageBuilder().terminator().ticket("OLD").unknown("one").build();
-    put(before);
+TEST_F(FlatPackageWriting, TrailersThatCannotBeSavedAreMovedAllTheSame) {
+    put(PackageBuilder().terminator().ticket("OLD").unknown("one"));
     platform.files.fail("writeFile", ENOSPC);
-    const MessageCapture output(kVerbosityVerbose);
-    EXPECT_FALSE(staple());
-    EXPECT_EQ(contents(), before);
-    EXPECT_EQ(package.appropriateExitCode(), 73);
-    EXPECT_THAT(output.lines().back(), StartsWith("Fatal error while writing new ticket to " + path + ". "));
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(contents(), PackageBuilder().terminator().unknown("one").ticket("NEW TICKET").build());
+    EXPECT_EQ(package.appropriateExitCode(), 0);
+}
+
+TEST_F(FlatPackageWriting, TrailersMoveThoughTheRecordInFrontOfThemCannotBeReadForTheCopy) {
+    put(PackageBuilder().terminator().ticket("OLD").unknown("one"));
+    package.ticketData();
+    platform.files.fail("handle.read", EIO);
+    EXPECT_TRUE(staple());
+    EXPECT_EQ(platform.files.count("writeFile"), 0U);
+    EXPECT_EQ(contents(), PackageBuilder().terminator().unknown("one").ticket("NEW TICKET").build());
 }
 
 TEST_F(FlatPackageWriting, DeletingRemovesTheTicketAndLeavesTheTerminator) {

@@ -46,16 +46,24 @@ TEST(BlobSet, HasARecordOfExactlyFiveKeysForEachBlobInIndexOrder) {
     const auto [blobs, lines] = read(twoBlobs().build(), 2);
     ASSERT_TRUE(blobs.has_value());
     ASSERT_EQ(blobs->size(), 2U);
-    EXPECT_EQ((*blobs)[0], (BlobRecord{{"cs slot type", Value(0U)},
-                                       {"offset", Value(28U)},
-                                       {"length", Value(20U)},
-                                       {"data", Value(first())},
-                                       {"magic", Value(0xFADE0C02U)}}));
-    EXPECT_EQ((*blobs)[1], (BlobRecord{{"cs slot type", Value(2U)},
-                                       {"offset", Value(48U)},
-                                       {"length", Value(12U)},
-                                       {"data", Value(second())},
-                                       {"magic", Value(0xFADE0C01U)}}));
+    const auto valuesOf = [](const BlobRecord& record) {
+        return foundation::Dictionary{{"cs slot type", record.at("cs slot type")},
+                                      {"offset", record.at("offset")},
+                                      {"length", record.at("length")},
+                                      {"data", record.at("data")},
+                                      {"magic", record.at("magic")}};
+    };
+    EXPECT_EQ(valuesOf((*blobs)[0]), (foundation::Dictionary{{"cs slot type", Value(0U)},
+                                                             {"offset", Value(28U)},
+                                                             {"length", Value(20U)},
+                                                             {"data", Value(first())},
+                                                             {"magic", Value(0xFADE0C02U)}}));
+    EXPECT_EQ(valuesOf((*blobs)[1]), (foundation::Dictionary{{"cs slot type", Value(2U)},
+                                                             {"offset", Value(48U)},
+                                                             {"length", Value(12U)},
+                                                             {"data", Value(second())},
+                                                             {"magic", Value(0xFADE0C01U)}}));
+    EXPECT_EQ((*blobs)[0].at("another key"), Value());
     EXPECT_EQ(lines, Lines{"Total Length: 60 Found blobs: 2"});
 }
 
@@ -149,15 +157,21 @@ SuperBlobBuilder blobsOfHeadersAlone(std::uint32_t count) {
     return builder;
 }
 
-TEST(BlobSet, HasAsManyBlobsAsTheLimitAndNoMore) {
-    const auto [most, lines] =
-        read(blobsOfHeadersAlone(codesign::kMaximumBlobCount).build(), codesign::kMaximumBlobCount);
-    ASSERT_TRUE(most.has_value());
-    EXPECT_EQ(most->size(), codesign::kMaximumBlobCount);
-    EXPECT_EQ(
-        read(blobsOfHeadersAlone(codesign::kMaximumBlobCount + 1).build(), codesign::kMaximumBlobCount + 1)
-            .blobs,
-        std::nullopt);
+TEST(BlobSet, HasMoreBlobsThan16BitsCount) {
+    constexpr std::uint32_t kCount = 70'000;
+    const Data superblob = blobsOfHeadersAlone(kCount).build();
+    const auto [blobs, lines] = read(superblob, kCount);
+    ASSERT_TRUE(blobs.has_value());
+    EXPECT_EQ(blobs->size(), kCount);
+    EXPECT_EQ(blobs->back().slotType, kCount - 1);
+}
+
+TEST(BlobSet, RefusesTwoEqualEntriesFarApart) {
+    constexpr std::uint32_t kCount = 1000;
+    SuperBlobBuilder builder = blobsOfHeadersAlone(kCount);
+    builder.blob(0, makeBlob(0xFADE0C01, {})).offsetOf(0, 12 + 8 * (kCount + 1));
+    EXPECT_EQ(read(builder.build(), kCount + 1).lines,
+              Lines{"Did not find 1001 unique blobs in the code signing data."});
 }
 
 class SuperblobWithTicket : public testing::Test {
@@ -167,7 +181,8 @@ class SuperblobWithTicket : public testing::Test {
         const auto blobs = orderedBlobSetForSuperBlob(superblob, count);
         EXPECT_TRUE(blobs.has_value());
         const MessageCapture output(kVerbosityVerbose);
-        Data result = superblobWithTicket(blobs.value_or(BlobSet{}), foundation::asBytes(ticket));
+        Data result =
+            toData(superblobWithTicket(blobs.value_or(BlobSet{}), foundation::asBytes(ticket)).view());
         lines = output.lines();
         return result;
     }
@@ -219,6 +234,28 @@ TEST_F(SuperblobWithTicket, DroppedTakesItByItsSlotAndNotByItsMagic) {
 TEST_F(SuperblobWithTicket, DroppedFromItsOwnOnlyBlobIsNoSuperblobAtAll) {
     EXPECT_EQ(rewritten(SuperBlobBuilder().blob(0x10002, test::ticketBlob("old")).build(), 1, ""), Data{});
     EXPECT_EQ(lines, Lines{"Adding 0 blobs to superblob. What about Blob?"});
+}
+
+TEST_F(SuperblobWithTicket, HasRoomBehindItForWhatTheCallerPutsThere) {
+    const Data superblob = twoBlobs().build();
+    const auto blobs = orderedBlobSetForSuperBlob(superblob, 2);
+    ASSERT_TRUE(blobs.has_value());
+    Data expected = twoBlobs().blob(0x10002, test::ticketBlob("ticket")).build();
+    expected.resize(expected.size() + 512);
+    EXPECT_EQ(toData(superblobWithTicket(*blobs, foundation::asBytes("ticket"), 512).view()), expected);
+}
+
+// Views of zeros that nobody reads.
+TEST_F(SuperblobWithTicket, IsNotMadeWhereItsLengthDoesNotFitIn32Bits) {
+    const foundation::SparseBuffer zeros(0xFFFFFFFF);
+    const auto blobOf = [&](std::uint64_t length) {
+        return BlobSet{{.slotType = 2, .offset = 20, .magic = 0, .data = zeros.view().first(length)}};
+    };
+    // Header 12, two entries of 8, the ticket's header 8 and its 6 bytes.
+    EXPECT_TRUE(hasRoomForTicket(blobOf(0xFFFFFFFF - 42), foundation::asBytes("ticket")));
+    EXPECT_FALSE(hasRoomForTicket(blobOf(0xFFFFFFFF - 41), foundation::asBytes("ticket")));
+    EXPECT_TRUE(hasRoomForTicket({{.slotType = 0x10002, .offset = 20, .magic = 0, .data = zeros.view()}},
+                                 foundation::asBytes("ticket")));
 }
 
 }  // namespace
