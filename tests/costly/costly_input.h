@@ -52,6 +52,7 @@ std::string filled(const std::function<std::string(std::size_t)>& make, std::siz
 
 // The rows, a function for each group.
 std::vector<CostlyInput> archiveInputs();
+std::vector<CostlyInput> artefactInputs();
 std::vector<CostlyInput> certificateInputs();
 std::vector<CostlyInput> jsonInputs();
 std::vector<CostlyInput> propertyListInputs();

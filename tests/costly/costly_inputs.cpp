@@ -8,7 +8,8 @@ namespace {
 
 std::vector<CostlyInput> allRows() {
     std::vector<CostlyInput> rows;
-    for (const auto& group : {archiveInputs, certificateInputs, jsonInputs, propertyListInputs}) {
+    for (const auto& group :
+         {archiveInputs, artefactInputs, certificateInputs, jsonInputs, propertyListInputs}) {
         std::vector<CostlyInput> more = group();
         rows.insert(rows.end(), std::make_move_iterator(more.begin()), std::make_move_iterator(more.end()));
     }
