@@ -24,7 +24,7 @@ void examineSlice(const codesign::ByteSource& source, const codesign::ImageSlice
     const auto range = codesign::findImageSignature(source, slice);
     if (!range) return;
     require(liesWithin(*range, slice.range), "a signature lies within its slice");
-    const Data superblob = codesign::readSuperBlob(source, range->offset, range->length);
+    const foundation::SharedBytes superblob = codesign::readSuperBlob(source, range->offset, range->length);
     require(superblob.size() <= range->length, "a superblob lies within its area");
     const auto signature = codesign::CodeSignature::parse(codesign::componentsOfSuperBlob(superblob));
     if (signature) signature->requireValid();

@@ -148,7 +148,7 @@ TEST_F(KeyMemory, HoldsNothingOfTheServersKeyWhenItIsReplacedOrGone) {
 }
 
 TEST_F(KeyMemory, HoldsNoTextOfTheKeysThatInitHasMade) {
-    const test::TemporaryDirectory other;
+    const pinwell::test::TemporaryDirectory other;
     static_cast<void>(ServiceDirectory::create(other / "site", {}, kNow));
     for (const char* const name : {"root", "ticket-intermediate", "ticket-signer", "server"})
         expectNoTraceOf(KeyTraces(other / ("site/service/" + std::string(name) + ".key")));
