@@ -82,9 +82,6 @@ TEST_F(Deferral, LeavesASignalToOthersIfTheThreadThatEndsItBlocksIt) {
         sigaddset(&blocked, SIGTERM);
         pthread_sigmask(SIG_BLOCK, &blocked, nullptr);
         deferral.reset();
-        sigset_t kept;
-        sigpending(&kept);
-        EXPECT_EQ(sigismember(&kept, SIGTERM), 0) << "the signal waits for a thread that does not take it";
     }).join();
     while (taken == 0) std::this_thread::yield();  // this thread is told, and takes it when it next can
     EXPECT_EQ(taken, 1);

@@ -112,14 +112,14 @@ TEST_F(FindingATicket, RefusesASuperblobThatItsTrailerPutsElsewhere) {
     EXPECT_EQ(imageRefusal().message, "the signature's offset and length are out of range");
 }
 
-TEST_F(FindingATicket, ReadsNoSuperblobThatIsLongerThanAnyIs) {
+TEST_F(FindingATicket, RefusesALongHoleInPlaceOfASuperblobByItsMagic) {
     const std::uint64_t length = 128ULL * 1024 * 1024 + 1;
     const auto trailer = DiskImageBuilder().codeSignOffset(1).codeSignLength(length).trailer();
     writeFile(path, std::string_view("x"));
     ASSERT_EQ(truncate(path.c_str(), static_cast<off_t>(1 + length)), 0);
     const FileDescriptor file(open(path.c_str(), O_WRONLY | O_APPEND | O_CLOEXEC));
     ASSERT_EQ(write(file.get(), trailer.data(), trailer.size()), 512);
-    EXPECT_EQ(imageRefusal().message, "the signature is too long");
+    EXPECT_EQ(imageRefusal().message, "the superblob does not begin with its magic");
 }
 
 TEST_F(FindingATicket, RefusesASuperblobThatIsNotBackToBack) {
