@@ -20,6 +20,13 @@ Action actionOf(const Record& record, std::optional<bool> revokedBefore, const O
     return Action::reinstated;
 }
 
+void refuseToGetAround(const Record& record, const std::string& revoked) {
+    throw Failure(EX_DATAERR,
+                  foundation::format("record %@ (%@) would make software of the revoked record %@ valid; "
+                                     "nothing was issued. To make it valid again: --reinstate --comment TEXT",
+                                     record.name, record.label, revoked));
+}
+
 Event makeEvent(Environment environment, const SignedRecord& entry, Action action, const Occasion& occasion,
                 std::string previous) {
     Event event;

@@ -91,8 +91,9 @@ struct EventQuery {
 class RecordStore : public RecordSource {
   public:
     /// Puts all records into the store, each in the place of an earlier record of its name, and appends an
-    /// event for each, in one transaction; or changes nothing. A valid ticket for a revoked record is refused
-    /// (EX_DATAERR), unless the occasion reinstates. When this returns, the change survives a crash.
+    /// event for each, in one transaction; or changes nothing. A valid ticket for a revoked record, or for a
+    /// hash that another record has revoked, is refused (EX_DATAERR), unless the occasion reinstates. When
+    /// this returns, the change survives a crash.
     virtual void put(Environment environment, const std::vector<SignedRecord>& records,
                      const Occasion& occasion) = 0;
 
@@ -114,6 +115,10 @@ class RecordStore : public RecordSource {
 /// What putting `record` does to a record of its name that is there already. Throws Failure (EX_DATAERR) if
 /// that would make a revoked record valid and the occasion does not reinstate.
 Action actionOf(const Record& record, std::optional<bool> revokedBefore, const Occasion& occasion);
+
+/// Throws the Failure (EX_DATAERR) of a put whose ticket would vouch for what the record `revoked` has
+/// revoked.
+[[noreturn]] void refuseToGetAround(const Record& record, const std::string& revoked);
 
 /// The event for a put, with its hash.
 Event makeEvent(Environment environment, const SignedRecord& entry, Action action, const Occasion& occasion,

@@ -43,6 +43,9 @@ constexpr const char* kRecordTables = R"(
     );
 )";
 
+// A store of version 2 may lack it, which costs time alone.
+constexpr const char* kHashIndex = "CREATE INDEX IF NOT EXISTS hash_by_bytes ON hash (environment, hash)";
+
 // Since version 2. The triggers stop mistakes; the chain of hashes shows intent.
 constexpr const char* kEventTable = R"(
     CREATE TABLE event (
@@ -139,6 +142,7 @@ void configureSqlite(SQLite::Database& database) {
 void createSqliteSchema(SQLite::Database& database) {
     SQLite::Transaction transaction(database);
     database.exec(kRecordTables);
+    database.exec(kHashIndex);
     database.exec(kEventTable);
     setVersion(database);
     transaction.commit();
@@ -155,6 +159,7 @@ void upgradeSqliteSchema(SQLite::Database& database, const std::string& path) {
                              version, kCurrentVersion));
     }
     keepCopy(path, version);
+    database.exec(kHashIndex);
     database.exec(kEventTable);
     logExistingRecords(database);
     setVersion(database);

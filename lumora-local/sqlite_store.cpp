@@ -76,6 +76,29 @@ std::optional<bool> isRevoked(SQLite::Database& database, Environment environmen
     return row.getColumn(0).getInt() != 0;
 }
 
+/// The name of a revoked record that a valid ticket for `record` would get around, although it is another
+/// one; `nullopt` if there is none. Whoever checks a ticket compares the bytes of a hash and not its
+/// algorithm, so the same hash under another name counts; so do the other hashes of a revoked artefact, if
+/// one is to have a ticket of its own. What two artefacts merely hold in common, nested code for instance,
+/// does not.
+std::optional<std::string> revokedBeside(SQLite::Database& database, Environment environment,
+                                         const Record& record) {
+    SQLite::Statement row(database,
+                          "SELECT r.name FROM hash h JOIN record r"
+                          " ON r.environment = h.environment AND r.name = h.name"
+                          " WHERE h.hash = ? AND h.environment = ? AND r.name <> ? AND r.revoked"
+                          " AND (? OR h.position = 0) LIMIT 1");
+    for (const CodeHash& hash : record.hashes) {
+        row.reset();
+        bindBlob(row, 1, hash.hash);
+        row.bind(2, environmentText(environment));
+        row.bind(3, record.name);
+        row.bind(4, &hash == &record.hashes.front() ? 1 : 0);
+        if (row.executeStep()) return row.getColumn(0).getString();
+    }
+    return std::nullopt;
+}
+
 void deleteRecord(SQLite::Database& database, Environment environment, const std::string& name) {
     SQLite::Statement statement(database, "DELETE FROM record WHERE environment = ? AND name = ?");
     statement.bind(1, environmentText(environment));
@@ -206,6 +229,9 @@ void SqliteStore::put(Environment environment, const std::vector<SignedRecord>& 
         for (const SignedRecord& entry : records) {
             const Action action =
                 actionOf(entry.record, isRevoked(*database_, environment, entry.record.name), occasion);
+            if (!entry.record.revoked && !occasion.reinstates)
+                if (const auto other = revokedBeside(*database_, environment, entry.record))
+                    refuseToGetAround(entry.record, *other);
             deleteRecord(*database_, environment, entry.record.name);
             insertRecord(*database_, environment, entry);
             insertHashes(*database_, environment, entry.record);

@@ -194,6 +194,46 @@ TEST_F(SqliteStoreTest, RefusesAValidTicketForARevokedRecord) {
     EXPECT_EQ(eventsOf(store).size(), 1U);
 }
 
+SignedRecord listing(const std::string& name, std::initializer_list<std::uint8_t> hashes) {
+    SignedRecord entry = makeRecord(name, "ticket");
+    entry.record.hashes.clear();
+    for (const std::uint8_t fill : hashes)
+        entry.record.hashes.push_back({2, Data(20, static_cast<std::byte>(fill))});
+    return entry;
+}
+
+TEST_F(SqliteStoreTest, RefusesATicketForARevokedHashUnderAnotherName) {
+    SqliteStore store(path_);
+    SignedRecord revoked = listing("2/2/a", {1, 2});
+    revoked.record.revoked = true;
+    store.put(kProduction, {revoked}, kOccasion);
+    SignedRecord sameBytes = listing("2/3/a", {1});
+    sameBytes.record.hashes.front().algorithm = 3;
+    EXPECT_THROW(store.put(kProduction, {sameBytes}, kOccasion), Failure);
+    // A slice of what was revoked, and something that holds it.
+    EXPECT_THROW(store.put(kProduction, {listing("2/2/b", {2})}, kOccasion), Failure);
+    EXPECT_THROW(store.put(kProduction, {listing("2/2/c", {3, 1})}, kOccasion), Failure);
+    EXPECT_EQ(eventsOf(store).size(), 1U);
+}
+
+TEST_F(SqliteStoreTest, IssuesWhatSharesNestedCodeWithARevokedRecord) {
+    SqliteStore store(path_);
+    SignedRecord revoked = listing("2/2/a", {1, 2});
+    revoked.record.revoked = true;
+    store.put(kProduction, {revoked}, kOccasion);
+    EXPECT_NO_THROW(store.put(kProduction, {listing("2/2/b", {3, 2})}, kOccasion));
+    EXPECT_NO_THROW(store.put(Environment::development, {listing("2/3/a", {1})}, kOccasion));
+}
+
+TEST_F(SqliteStoreTest, ReinstatesARevokedHashUnderAnotherNameIfTold) {
+    SqliteStore store(path_);
+    SignedRecord revoked = listing("2/2/a", {1});
+    revoked.record.revoked = true;
+    store.put(kProduction, {revoked}, kOccasion);
+    EXPECT_NO_THROW(
+        store.put(kProduction, {listing("2/3/a", {1})}, {Date{300}, "boss", std::nullopt, "found", true}));
+}
+
 TEST_F(SqliteStoreTest, RefusesItAlsoIfTheRevocationComesFromAnotherConnection) {
     SqliteStore store(path_);
     store.put(kProduction, {makeRecord("a", "ticket")}, kOccasion);
