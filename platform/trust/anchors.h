@@ -10,9 +10,13 @@
 
 namespace pinwell::trust {
 
-/// Of one PEM file; a larger one counts for nothing. The list of public authorities that systems carry has a
-/// quarter of a megabyte.
+/// Of one PEM file whose certificates are trusted; a larger one counts for nothing. The list of public
+/// authorities that systems carry has a quarter of a megabyte.
 inline constexpr std::size_t kMaximumPemFileSize = 4ULL * 1024 * 1024;
+
+/// Of a PEM file whose certificates are distrusted. It is the user's own, and one that is not read denies
+/// nothing.
+inline constexpr std::size_t kMaximumDeniedFileSize = 256ULL * 1024 * 1024;
 
 /// Of a file whose certificates are trusted; one that holds more counts for nothing. Distrust has no such
 /// limit: the size of the file bounds it.

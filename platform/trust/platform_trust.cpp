@@ -10,10 +10,10 @@ namespace {
 using LogError = std::function<void(std::string_view)>;
 
 /// Hands over the contents of each file that can be read.
-void readFiles(const std::vector<std::string>& paths, const LogError& logError,
+void readFiles(const std::vector<std::string>& paths, std::size_t maximumSize, const LogError& logError,
                const std::function<void(const std::string& path, ByteView text)>& use) {
     for (const std::string& path : paths) {
-        const foundation::Result<Data> text = foundation::readSmallFile(path, kMaximumPemFileSize);
+        const foundation::Result<Data> text = foundation::readSmallFile(path, maximumSize);
         if (text) {
             use(path, *text);
         } else {
@@ -25,7 +25,7 @@ void readFiles(const std::vector<std::string>& paths, const LogError& logError,
 
 CertificateList loadFiles(const std::vector<std::string>& paths, const LogError& logError) {
     CertificateList certificates;
-    readFiles(paths, logError, [&](const std::string& path, ByteView text) {
+    readFiles(paths, kMaximumPemFileSize, logError, [&](const std::string& path, ByteView text) {
         if (const std::optional<CertificateList> read = readPem(text)) {
             certificates.insert(certificates.end(), read->begin(), read->end());
         } else {
@@ -38,7 +38,7 @@ CertificateList loadFiles(const std::vector<std::string>& paths, const LogError&
 
 DenyList loadDenied(const std::vector<std::string>& paths, const LogError& logError) {
     DenyList denied;
-    readFiles(paths, logError, [&](const std::string& path, ByteView text) {
+    readFiles(paths, kMaximumDeniedFileSize, logError, [&](const std::string& path, ByteView text) {
         readDeniedPem(text, denied, [&](const std::string& reason) {
             logError(foundation::format("Could not read certificates. %@: %@.", path, reason));
         });

@@ -3,6 +3,8 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <filesystem>
+
 #include "support/certificate_builder.h"
 #include "support/file_properties.h"
 #include "support/temporary_directory.h"
@@ -116,7 +118,8 @@ INSTANTIATE_TEST_SUITE_P(
         Unreadable{"Text", [](const std::string& path) { test::writeFile(path, "text"); }, "not a PEM file"},
         Unreadable{"Giant",
                    [](const std::string& path) {
-                       test::writeFile(path, chain().root.pem() + std::string(kMaximumPemFileSize, ' '));
+                       test::writeFile(path, chain().root.pem());
+                       std::filesystem::resize_file(path, kMaximumDeniedFileSize + 1);
                    },
                    "File too large"}),
     [](const auto& tested) { return std::string(tested.param.name); });
@@ -131,6 +134,15 @@ std::string base64Of(const test::IssuedCertificate& certificate) {
 
 std::string block(const std::string& body) {
     return "-----BEGIN CERTIFICATE-----\n" + body + "-----END CERTIFICATE-----\n";
+}
+
+TEST(LargeDenyFile, StillDenies) {
+    const test::TemporaryDirectory directory;
+    const std::string remark(kMaximumPemFileSize, '#');
+    test::writeFile(directory / "user-trust/deny/large.pem", remark + "\n" + chain().leaf.pem());
+    const Loaded loaded = loadFrom(directory);
+    EXPECT_THAT(loaded.log, testing::IsEmpty());
+    EXPECT_EQ(loaded.anchors.denied.size(), 1U);
 }
 
 struct DamagedBlock {
