@@ -1,15 +1,28 @@
 #include "lumora-local/tls_context.h"
 
+#include <sys/stat.h>
+
 #include <boost/asio/ssl/context.hpp>
 
+#include "foundation/format.h"
+#include "lumora-local/failure.h"
 #include "lumora-local/key_file.h"
 #include "lumora-local/openssl_handles.h"
 
 namespace pinwell::lumora {
 namespace {
 
+/// A pipe would hold the reload, and the signals after it, until somebody writes to it.
+void requireRegularFile(const std::string& path) {
+    struct stat status {};
+    if (stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode))
+        throw Failure(EX_CONFIG, foundation::format("%@ is no regular file", path));
+}
+
 std::shared_ptr<boost::asio::ssl::context> load(const std::string& certificatePath,
                                                 const std::string& keyPath) {
+    requireRegularFile(certificatePath);
+    requireRegularFile(keyPath);
     auto context = std::make_shared<boost::asio::ssl::context>(boost::asio::ssl::context::tls_server);
     SSL_CTX* native = context->native_handle();
     require(SSL_CTX_set_min_proto_version(native, TLS1_2_VERSION) == 1, "set up TLS");

@@ -12,6 +12,7 @@
 #include "foundation/json.h"
 #include "foundation/value.h"
 #include "running_service.h"
+#include "support/file_properties.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -234,6 +235,21 @@ TEST(Serve, KeepsItsCertificateWhenTheNewOneCannotBeUsed) {
     pinwell::test::writeFile(service.path() + "/service/server.pem", "no certificate");
     for (int i = 0; i < 3; ++i) service.sendSignal(SIGHUP);
     while (service.errors().find("goes on") == std::string::npos) std::this_thread::yield();
+    EXPECT_EQ(certificateOf(service), before);
+    service.sendSignal(SIGTERM);
+    EXPECT_EQ(service.wait(), 0);
+}
+
+TEST(Serve, KeepsItsCertificateAndHearsSignalsWhenTheKeyIsAPipe) {
+    RunningService service;
+    const std::string before = certificateOf(service);
+    for (const char* file : {"/service/server.key", "/service/server.pem"}) {
+        std::filesystem::remove(service.path() + file);
+        pinwell::test::makeFifo(service.path() + file);
+        service.sendSignal(SIGHUP);
+        while (service.errors().find(std::string(file) + " is no regular file") == std::string::npos)
+            std::this_thread::yield();
+    }
     EXPECT_EQ(certificateOf(service), before);
     service.sendSignal(SIGTERM);
     EXPECT_EQ(service.wait(), 0);
