@@ -32,18 +32,19 @@ SuperBlobBuilder twoBlobs() {
 }
 
 struct Outcome {
+    Data superblob;  // which the blobs are views of
     std::optional<BlobSet> blobs;
     Lines lines;
 };
 
-Outcome read(const Data& superblob, std::uint32_t count) {
+Outcome read(Data superblob, std::uint32_t count) {
     const MessageCapture output(kVerbosityVerbose);
     auto blobs = orderedBlobSetForSuperBlob(superblob, count);
-    return {std::move(blobs), output.lines()};
+    return {std::move(superblob), std::move(blobs), output.lines()};
 }
 
 TEST(BlobSet, HasARecordOfExactlyFiveKeysForEachBlobInIndexOrder) {
-    const auto [blobs, lines] = read(twoBlobs().build(), 2);
+    const auto [viewed, blobs, lines] = read(twoBlobs().build(), 2);
     ASSERT_TRUE(blobs.has_value());
     ASSERT_EQ(blobs->size(), 2U);
     const auto valuesOf = [](const BlobRecord& record) {
@@ -69,26 +70,27 @@ TEST(BlobSet, HasARecordOfExactlyFiveKeysForEachBlobInIndexOrder) {
 
 TEST(BlobSet, OfTheEmptySuperblobIsEmpty) {
     EXPECT_EQ(emptySuperblob(), ByteWriter().be32(0xFADE0CC0).be32(12).be32(0).data());
-    const auto [blobs, lines] = read(emptySuperblob(), 0);
+    const auto [viewed, blobs, lines] = read(emptySuperblob(), 0);
     EXPECT_EQ(blobs, BlobSet{});
     EXPECT_EQ(lines, Lines{"Total Length: 12 Found blobs: 0"});
 }
 
 TEST(BlobSet, RefusesTwoEqualIndexEntries) {
     const Data superblob = SuperBlobBuilder().blob(2, second()).blob(2, second()).offsetOf(2, 28).build();
-    const auto [blobs, lines] = read(superblob, 2);
+    const auto [viewed, blobs, lines] = read(superblob, 2);
     EXPECT_EQ(blobs, std::nullopt);
     EXPECT_EQ(lines, Lines{"Did not find 2 unique blobs in the code signing data."});
 }
 
 TEST(BlobSet, TellsTwoBlobsOfOneSlotApart) {
-    const auto [blobs, lines] = read(SuperBlobBuilder().blob(2, second()).blob(2, second()).build(), 2);
+    const auto [viewed, blobs, lines] =
+        read(SuperBlobBuilder().blob(2, second()).blob(2, second()).build(), 2);
     ASSERT_TRUE(blobs.has_value());
     EXPECT_EQ(blobs->size(), 2U);
 }
 
 TEST(BlobSet, RefusesAnIndexOutOfFileOrder) {
-    const auto [blobs, lines] = read(twoBlobs().reverseIndex().build(), 2);
+    const auto [viewed, blobs, lines] = read(twoBlobs().reverseIndex().build(), 2);
     EXPECT_EQ(blobs, std::nullopt);
     EXPECT_EQ(lines,
               (Lines{"Calculated length (18446744073709551596) does not match embedded blob length (12)",
@@ -97,7 +99,7 @@ TEST(BlobSet, RefusesAnIndexOutOfFileOrder) {
 
 TEST(BlobSet, RefusesAGapBetweenBlobs) {
     const Data superblob = SuperBlobBuilder().blob(0, first()).gap(4).blob(2, second()).build();
-    const auto [blobs, lines] = read(superblob, 2);
+    const auto [viewed, blobs, lines] = read(superblob, 2);
     EXPECT_EQ(blobs, std::nullopt);
     EXPECT_EQ(lines, (Lines{"Calculated length (24) does not match embedded blob length (20)",
                             "Length of all blobs (28) did not match length of code signing data (64)."}));
@@ -105,7 +107,7 @@ TEST(BlobSet, RefusesAGapBetweenBlobs) {
 
 TEST(BlobSet, RefusesAGapBehindTheIndex) {
     const Data superblob = SuperBlobBuilder().gap(4).blob(0, first()).blob(2, second()).build();
-    const auto [blobs, lines] = read(superblob, 2);
+    const auto [viewed, blobs, lines] = read(superblob, 2);
     EXPECT_EQ(blobs, std::nullopt);
     EXPECT_EQ(lines, Lines{"Length of all blobs (60) did not match length of code signing data (64)."});
 }
@@ -113,7 +115,7 @@ TEST(BlobSet, RefusesAGapBehindTheIndex) {
 TEST(BlobSet, RefusesBytesBehindTheLastBlob) {
     Data superblob = twoBlobs().build();
     superblob.push_back(std::byte{0});
-    const auto [blobs, lines] = read(superblob, 2);
+    const auto [viewed, blobs, lines] = read(superblob, 2);
     EXPECT_EQ(blobs, std::nullopt);
     EXPECT_EQ(lines, (Lines{"Calculated length (13) does not match embedded blob length (12)",
                             "Length of all blobs (48) did not match length of code signing data (61)."}));
@@ -122,14 +124,15 @@ TEST(BlobSet, RefusesBytesBehindTheLastBlob) {
 TEST(BlobSet, IsShorterThanTheCountWhenTheBlobsBeforeAWrongOneFillTheSuperblob) {
     // The second entry leads to the superblob's end, where there is no room even for a header.
     const Data superblob = SuperBlobBuilder().blob(0, first()).blob(2, {}).build();
-    const auto [blobs, lines] = read(superblob, 2);
+    const auto [viewed, blobs, lines] = read(superblob, 2);
     ASSERT_TRUE(blobs.has_value());
     EXPECT_EQ(blobs->size(), 1U);
     EXPECT_EQ(lines, Lines{"Total Length: 48 Found blobs: 1"});
 }
 
 TEST(BlobSet, RefusesABlobThatBeginsBehindTheSuperblob) {
-    const auto [blobs, lines] = read(SuperBlobBuilder().blob(2, second()).offsetOf(2, 0xFFFFFFF0).build(), 1);
+    const auto [viewed, blobs, lines] =
+        read(SuperBlobBuilder().blob(2, second()).offsetOf(2, 0xFFFFFFF0).build(), 1);
     EXPECT_EQ(blobs, std::nullopt);
     EXPECT_EQ(lines, Lines{"Length of all blobs (20) did not match length of code signing data (32)."});
 }
@@ -137,7 +140,7 @@ TEST(BlobSet, RefusesABlobThatBeginsBehindTheSuperblob) {
 TEST(BlobSet, RefusesABlobThatEndsBehindTheSuperblob) {
     // Its own length (1000) agrees with the offsets (28 and 1028).
     const Data overlong = ByteWriter().be32(0xFADE0C01).be32(1000).be32(0).data();
-    const auto [blobs, lines] =
+    const auto [viewed, blobs, lines] =
         read(SuperBlobBuilder().blob(2, overlong).blob(5, second()).offsetOf(5, 1028).build(), 2);
     EXPECT_EQ(blobs, std::nullopt);
     EXPECT_EQ(lines, Lines{"Length of all blobs (28) did not match length of code signing data (52)."});
@@ -146,7 +149,7 @@ TEST(BlobSet, RefusesABlobThatEndsBehindTheSuperblob) {
 TEST(BlobSet, RefusesAnIndexThatTheSuperblobIsTooShortFor) {
     Data superblob = SuperBlobBuilder().count(1).build();
     superblob.resize(16);
-    const auto [blobs, lines] = read(superblob, 1);
+    const auto [viewed, blobs, lines] = read(superblob, 1);
     EXPECT_EQ(blobs, std::nullopt);
     EXPECT_EQ(lines, Lines{"Did not find 1 unique blobs in the code signing data."});
 }
@@ -160,7 +163,7 @@ SuperBlobBuilder blobsOfHeadersAlone(std::uint32_t count) {
 TEST(BlobSet, HasMoreBlobsThan16BitsCount) {
     constexpr std::uint32_t kCount = 70'000;
     const Data superblob = blobsOfHeadersAlone(kCount).build();
-    const auto [blobs, lines] = read(superblob, kCount);
+    const auto [viewed, blobs, lines] = read(superblob, kCount);
     ASSERT_TRUE(blobs.has_value());
     EXPECT_EQ(blobs->size(), kCount);
     EXPECT_EQ(blobs->back().slotType, kCount - 1);
