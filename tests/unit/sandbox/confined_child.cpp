@@ -6,9 +6,9 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <array>
 #include <cerrno>
-#include <system_error>
+
+#include "child_process.h"
 
 namespace pinwell::test {
 namespace {
@@ -17,25 +17,9 @@ constexpr int kUnconfined = 250;
 
 // The child's exit status, and what it wrote.
 Outcome inChild(const std::function<int(int output)>& body) {
-    std::array<int, 2> ends{};
-    if (pipe(ends.data()) != 0) throw std::system_error(errno, std::generic_category(), "pipe");
-    const pid_t child = fork();
-    if (child < 0) throw std::system_error(errno, std::generic_category(), "fork");
-    if (child == 0) {
-        close(ends[0]);
-        _exit(body(ends[1]));
-    }
-    close(ends[1]);
-    Outcome outcome;
-    std::array<char, 512> piece{};
-    for (ssize_t count = 0; (count = read(ends[0], piece.data(), piece.size())) > 0;)
-        outcome.said.append(piece.data(), static_cast<std::size_t>(count));
-    close(ends[0]);
-    int status = 0;
-    waitpid(child, &status, 0);
-    if (!WIFEXITED(status)) ADD_FAILURE() << "the child was ended by signal " << WTERMSIG(status);
-    outcome.result = WEXITSTATUS(status);
-    return outcome;
+    const ChildEnd end = endOfChild(body);
+    if (!WIFEXITED(end.status)) ADD_FAILURE() << "the child was ended by signal " << WTERMSIG(end.status);
+    return {end.said, WEXITSTATUS(end.status)};
 }
 
 // A failed write shows as what is missing from the output.

@@ -9,14 +9,13 @@
 
 #include <array>
 #include <atomic>
-#include <cerrno>
 #include <csignal>
 #include <cstdint>
 #include <functional>
 #include <string>
-#include <system_error>
 #include <thread>
 
+#include "child_process.h"
 #include "foundation/sanitized.h"
 #include "foundation/signal_deferral.h"
 #include "foundation/stack_guard.h"
@@ -26,33 +25,15 @@ namespace {
 
 const std::atomic<std::int32_t> kStatus{65};
 
-struct End {
-    int status = 0;  // as waitpid(2) has it
-    std::string said;
-};
-
 // What a child does under a limit of one second, and how it ends.
-End endOf(const std::function<void(int output)>& body) {
-    std::array<int, 2> ends{};
-    if (pipe(ends.data()) != 0) throw std::system_error(errno, std::generic_category(), "pipe");
-    const pid_t child = fork();
-    if (child < 0) throw std::system_error(errno, std::generic_category(), "fork");
-    if (child == 0) {
-        close(ends[0]);
+ChildEnd endOf(const std::function<void(int output)>& body) {
+    return endOfChild([&](int output) {
         const rlimit none{0, 0};
         setrlimit(RLIMIT_CORE, &none);
-        sandbox::limitRunaways(1, {ends[1], "time", "stack", &kStatus});
-        body(ends[1]);
-        _exit(0);
-    }
-    close(ends[1]);
-    End end;
-    std::array<char, 64> piece{};
-    for (ssize_t count = 0; (count = read(ends[0], piece.data(), piece.size())) > 0;)
-        end.said.append(piece.data(), static_cast<std::size_t>(count));
-    close(ends[0]);
-    waitpid(child, &end.status, 0);
-    return end;
+        sandbox::limitRunaways(1, {output, "time", "stack", &kStatus});
+        body(output);
+        return 0;
+    });
 }
 
 void useProcessorTime(rlim_t seconds) {
@@ -72,14 +53,14 @@ int fall(int depth) {
 }
 
 TEST(Runaway, ThatUsesUpItsProcessorTimeEndsWithOneLine) {
-    const End end = endOf([](int) { useProcessorTime(10); });
+    const ChildEnd end = endOf([](int) { useProcessorTime(10); });
     ASSERT_TRUE(WIFEXITED(end.status));
     EXPECT_EQ(WEXITSTATUS(end.status), 65);
     EXPECT_EQ(end.said, "time\n");
 }
 
 TEST(Runaway, EndsWhenTheWriteThatItIsInHasEnded) {
-    const End end = endOf([](int output) {
+    const ChildEnd end = endOf([](int output) {
         const foundation::SignalDeferral writing;
         raise(SIGXCPU);
         [[maybe_unused]] const ssize_t written = write(output, "written\n", 8);
@@ -89,7 +70,7 @@ TEST(Runaway, EndsWhenTheWriteThatItIsInHasEnded) {
 }
 
 TEST(Runaway, SaysNothingIfItMayNot) {
-    const End end = endOf([](int) {
+    const ChildEnd end = endOf([](int) {
         sandbox::limitRunaways(1, {-1, "time", "stack", &kStatus});
         raise(SIGXCPU);
     });
@@ -99,7 +80,7 @@ TEST(Runaway, SaysNothingIfItMayNot) {
 
 TEST(Runaway, ThatUsesUpItsStackEndsWithOneLine) {
     if (foundation::kSanitized) GTEST_SKIP() << "the sanitizer has a handler of its own";
-    const End end = endOf([](int) {
+    const ChildEnd end = endOf([](int) {
         const foundation::StackGuard guard;
         fall(0);
     });
@@ -110,7 +91,7 @@ TEST(Runaway, ThatUsesUpItsStackEndsWithOneLine) {
 
 TEST(Runaway, MayBeAnyThreadWithAGuard) {
     if (foundation::kSanitized) GTEST_SKIP() << "the sanitizer has a handler of its own";
-    const End end = endOf([](int) {
+    const ChildEnd end = endOf([](int) {
         std::thread([] {
             const foundation::StackGuard guard;
             fall(0);
@@ -132,7 +113,7 @@ TEST(Runaway, IsNoOtherCrash) {
                            raise(SIGSEGV);
                        })};
     for (const auto& crash : ways) {
-        const End end = endOf(crash);
+        const ChildEnd end = endOf(crash);
         EXPECT_TRUE(WIFSIGNALED(end.status));
         EXPECT_EQ(WTERMSIG(end.status), SIGSEGV);
         EXPECT_EQ(end.said, "");
@@ -140,7 +121,7 @@ TEST(Runaway, IsNoOtherCrash) {
 }
 
 TEST(Runaway, KeepsALowerLimitOfTheCallers) {
-    const End end = endOf([](int output) {
+    const ChildEnd end = endOf([](int output) {
         sandbox::limitRunaways(1000, {output, "time", "stack", &kStatus});
         rlimit limit{};
         getrlimit(RLIMIT_CPU, &limit);
