@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "codesign/code_error.h"
+#include "companion/command_line.h"
 #include "companion/parse_errors.h"
 #include "companion/version.h"
 #include "foundation/format.h"
@@ -35,8 +36,7 @@ using namespace pinwell;
 using namespace pinwell::gate;
 
 void complain(std::string_view text) {
-    const std::string line = "pinwell-gate: " + foundation::escapeForTerminal(text) + "\n";
-    std::fwrite(line.data(), 1, line.size(), stderr);
+    companion::complain("pinwell-gate", text);
 }
 
 /// A document that goes to a file, which is opened before any artefact is read, or to standard output.
