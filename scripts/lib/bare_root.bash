@@ -59,6 +59,7 @@ unpack_bare() {
   mkdir -p "$2"
   tar --extract --file="$cache/debian-$1.tar" --directory="$2" --numeric-owner --same-permissions || return 1
   cp /etc/resolv.conf "$2/etc/resolv.conf"
+  echo force-unsafe-io > "$2/etc/dpkg/dpkg.cfg.d/no-sync"  # it is thrown away, and waiting for disks takes minutes
   mkdir -p "$2/var/cache/pinwell-objects"
 }
 
