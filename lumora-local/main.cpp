@@ -19,13 +19,14 @@
 #include "lumora-local/failure.h"
 #include "lumora-local/history.h"
 #include "lumora-local/key_file.h"
+#include "lumora-local/migration.h"
 #include "lumora-local/pinwell_artefact_hasher.h"
 #include "lumora-local/rfc3339.h"
 #include "lumora-local/samples.h"
 #include "lumora-local/serve_command.h"
 #include "lumora-local/service_directory.h"
 #include "lumora-local/service_place.h"
-#include "lumora-local/sqlite_store.h"
+#include "lumora-local/store_opening.h"
 #include "sandbox/sandbox.h"
 #include "src/confinement.h"
 
@@ -53,6 +54,7 @@ struct Arguments {
     std::string head;
     bool showsHead = false;
     bool verifies = false;
+    std::string to;
     std::string listen;
     std::string readyFile;
     bool updatePlatform = false;
@@ -113,7 +115,7 @@ void giveUpRights(const Arguments& arguments, const ServiceDirectory& directory)
         confinementOfReading(arguments.subjects, foundation::PlatformDirectory::current());
     rights.calls = sandbox::Calls::service;
     rights.files.push_back({directory.path(), Access::write});
-    sandbox::append(rights.files, sandbox::fileAndItsLinks(directory.storePath(), Access::write));
+    addStoreRights(rights, directory);
     rights.files.push_back({foundation::temporaryDirectory().path(), Access::write});  // of the store
     static_cast<void>(sandbox::confine(rights));
 }
@@ -122,10 +124,11 @@ void giveUpRights(const Arguments& arguments, const ServiceDirectory& directory)
 template <class Command>
 void withRegistry(const Arguments& arguments, Command&& command) {
     const auto directory = openService(arguments);
+    requireChangesAllowed(directory);
     const TicketSigner signer(directory.signerKeyPath(), directory.signerChainPaths());
-    SqliteStore store(directory.storePath());
+    const std::unique_ptr<RecordStore> store = openStore(directory);
     const std::unique_ptr<ArtefactHasher> hasher = makePinwellArtefactHasher();
-    const Registry registry{store, signer, *hasher, parseEnvironment(arguments.environment).value(),
+    const Registry registry{*store, signer, *hasher, parseEnvironment(arguments.environment).value(),
                             nameOfCaller()};
     giveUpRights(arguments, directory);
     const std::vector<Record> records = command(registry);
@@ -156,8 +159,8 @@ void runRevoke(Arguments& arguments) {
 }
 
 void runList(const Arguments& arguments) {
-    SqliteStore store(openService(arguments).storePath());
-    const auto records = store.list(parseEnvironment(arguments.environment).value());
+    const auto records =
+        openStore(openService(arguments))->list(parseEnvironment(arguments.environment).value());
     writeText(arguments.asJson ? recordsAsJson(records) : describeRecords(records));
 }
 
@@ -187,11 +190,11 @@ void runLog(Arguments& arguments) {
                                                        arguments.since));
         }
     }
-    SqliteStore store(openService(arguments).storePath());
+    const std::unique_ptr<RecordStore> store = openStore(openService(arguments));
     if (arguments.verifies) {
         const std::optional<std::string> known =
             arguments.head.empty() ? std::nullopt : std::optional(arguments.head);
-        const HistorySummary summary = verifyHistory(store, known);
+        const HistorySummary summary = verifyHistory(*store, known);
         if (arguments.showsHead && arguments.head.empty()) {
             writeText(summary.head + "\n");
         } else {
@@ -199,10 +202,22 @@ void runLog(Arguments& arguments) {
                                          summary.head));
         }
     } else if (arguments.showsHead) {
-        writeText(store.headHash() + "\n");
+        writeText(store->headHash() + "\n");
     } else {
-        writeEvents(store, query, arguments.asJson, writePart);
+        writeEvents(*store, query, arguments.asJson, writePart);
     }
+}
+
+void runMigrate(const Arguments& arguments) {
+    if (arguments.to.empty()) throw Failure(EX_USAGE, "migrate needs --to URL");
+    const ServiceDirectory directory = openService(arguments);
+    const Migration migration = migrate(directory, arguments.to);
+    writeText(
+        foundation::format("Copied %zu records and %zu events, and compared them; the chain ends with %s.\n"
+                           "%@ names the database now; the earlier one is %@.\n"
+                           "Start the service again if it runs: it answers no lookups until then.\n",
+                           migration.records, migration.events, migration.head, directory.descriptionPath(),
+                           migration.oldDescription));
 }
 
 void runSample(const Arguments& arguments) {
@@ -320,6 +335,9 @@ void declareCommands(CLI::App& app, Arguments& arguments) {
 
     declareLog(*add("log", "Show what was done to the records, or check it", kServiceHelp, runLog),
                arguments);
+
+    add("migrate", "Move the records into a PostgreSQL database", kServiceHelp, runMigrate)
+        ->add_option("--to", arguments.to, "Its URL: postgresql://...");
 
     add("sample", "Write a sample of each kind of artefact", "Where to write them", runSample);
 

@@ -82,6 +82,20 @@ struct HistoryVisitor {
     std::function<void(const RecordState&)> record;
 };
 
+/// Takes the whole contents of a store: every event, oldest first, and then every record, by environment and
+/// name.
+struct ContentsVisitor {
+    std::function<void(const Event&)> event;
+    std::function<void(Environment, const SignedRecord&)> record;
+};
+
+/// What a store is about to do.
+enum class StoreUse { reading, changing };
+
+/// Is asked before each reading, and within each transaction that changes records, when no other writer can
+/// come in between. It throws Failure to forbid it. From any thread.
+using StoreGuard = std::function<void(StoreUse)>;
+
 struct EventQuery {
     std::optional<std::string> record;
     std::optional<foundation::Date> since;  // events of this second and later
@@ -110,6 +124,13 @@ class RecordStore : public RecordSource {
 
     /// The hash of the last event; hashBeforeTheFirstEvent() if there is none.
     virtual std::string headHash() = 0;
+
+    /// All that the store holds, as of one point in time. Memory does not grow with it.
+    virtual void walkContents(const ContentsVisitor& visitor) = 0;
+
+    /// Runs `work`, which may read this store, while nobody can change it. `work` gets a function that throws
+    /// if that has ceased to be so.
+    virtual void holdStill(const std::function<void(const std::function<void()>& confirm)>& work) = 0;
 };
 
 /// What putting `record` does to a record of its name that is there already. Throws Failure (EX_DATAERR) if

@@ -13,7 +13,7 @@
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/server.h"
-#include "lumora-local/sqlite_store.h"
+#include "lumora-local/store_opening.h"
 #include "sandbox/sandbox.h"
 
 namespace pinwell::lumora {
@@ -92,7 +92,7 @@ void giveUpRights(const ServiceDirectory& directory, const ServeOutput& output) 
     rights.files.push_back({directory.path(), sandbox::Access::write});
     for (const std::string& path : {directory.serverCertificatePath(), directory.serverKeyPath()})
         sandbox::append(rights.files, sandbox::fileAndItsLinks(path));
-    sandbox::append(rights.files, sandbox::fileAndItsLinks(directory.storePath(), sandbox::Access::write));
+    addStoreRights(rights, directory);
     for (const std::string& missing : sandbox::confine(rights)) output.err(missing);
 }
 
@@ -107,12 +107,12 @@ void serve(const ServiceDirectory& directory, const ServeOptions& options, const
     // A file that an earlier run left would tell of a service that is not there yet.
     if (options.readyFile) ::unlink(options.readyFile->c_str());
     TlsContext tls(directory.serverCertificatePath(), directory.serverKeyPath());
-    SqliteStore store(directory.storePath());
+    const std::unique_ptr<RecordStore> store = openStore(directory);
     Listener listener(options.listen ? *options.listen : directory.advertisedEndpoint());
     const Endpoint endpoint = reachable(directory, listener.endpoint());
     announce(directory, options, output, endpoint);
 
-    const LookupService lookups(store, directory.hosts(), endpoint);
+    const LookupService lookups(*store, directory.hosts(), endpoint);
     ServerLimits limits;
     limits.connections = connectionsThatFit();
     giveUpRights(directory, output);

@@ -1,5 +1,8 @@
 #include "lumora-local/service_directory.h"
 
+#include <filesystem>
+#include <system_error>
+
 #include "foundation/bytes.h"
 #include "foundation/file_io.h"
 #include "foundation/format.h"
@@ -28,6 +31,8 @@ constexpr mode_t kPrivateFileMode = 0600;
 constexpr std::size_t kMaximumDescriptionSize = 1024 * 1024;
 
 constexpr std::string_view kHostsKey = "hosts";
+constexpr std::string_view kStoreKey = "store";
+constexpr std::string_view kRoleKey = "role";
 constexpr std::string_view kLumoraKey = "lumora";
 constexpr std::string_view kHostKey = "host";
 
@@ -48,6 +53,39 @@ Value readJson(const std::string& path) {
 
 Value platformDescription(const Endpoint& endpoint) {
     return Dictionary{{std::string(kLumoraKey), Dictionary{{std::string(kHostKey), toString(endpoint)}}}};
+}
+
+/// `nullopt` if the description has none.
+std::optional<std::string> storeUrlIn(const Value& value, const std::string& description) {
+    if (value.dictionary() == nullptr || !value.dictionary()->contains(std::string(kStoreKey)))
+        return std::nullopt;
+    const std::string* url = value[kStoreKey].string();
+    const std::string place = description + ": \"store\"";
+    requireStoreUrl(url != nullptr ? *url : "", place);
+    return *url;
+}
+
+Role roleIn(const Value& value, const std::string& description) {
+    if (value.dictionary() == nullptr || !value.dictionary()->contains(std::string(kRoleKey)))
+        return Role::full;
+    const std::string* role = value[kRoleKey].string();
+    if (role == nullptr || *role != "lookup") {
+        throw Failure(EX_CONFIG, format("%@: \"role\" is %@; it can be \"lookup\" or absent", description,
+                                        value[kRoleKey]));
+    }
+    return Role::lookup;
+}
+
+/// A name beside `path` that nothing has.
+std::string freeNameBeside(const std::string& path) {
+    const std::string first = path + ".before-migration";
+    std::string name = first;
+    std::error_code ignored;
+    for (int attempt = 2; std::filesystem::exists(std::filesystem::symlink_status(name, ignored));
+         ++attempt) {
+        name = first + "." + std::to_string(attempt);
+    }
+    return name;
 }
 
 void writeIdentity(const std::string& directory, const std::string& name, const Identity& identity) {
@@ -79,6 +117,14 @@ void buildService(const std::string& directory, const Authority& authority,
 }
 
 }  // namespace
+
+void requireStoreUrl(const std::string& url, const std::string& place) {
+    const bool known = url.starts_with("postgresql://") || url.starts_with("postgres://");
+    // The text is not repeated: it may hold a password.
+    if (!known || url.find('\0') != std::string::npos) {
+        throw Failure(EX_CONFIG, format("%@ is not a URL that begins with postgresql://", place));
+    }
+}
 
 ServiceDirectory ServiceDirectory::create(const std::string& path, const NewService& service,
                                           foundation::Date now) {
@@ -113,7 +159,23 @@ ServiceDirectory ServiceDirectory::open(const std::string& path) {
         }
     }
     if (hosts.empty()) throw Failure(EX_CONFIG, format("%@ names no hosts", description));
-    return {path, std::move(hosts)};
+    ServiceDirectory directory(path, std::move(hosts));
+    directory.storeUrl_ = storeUrlIn(value, description);
+    directory.role_ = roleIn(value, description);
+    return directory;
+}
+
+std::string ServiceDirectory::moveStore(const std::string& url) const {
+    const std::string path = descriptionPath();
+    const Value old = readJson(path);
+    if (old.dictionary() == nullptr) throw Failure(EX_CONFIG, format("%@ is damaged", path));
+    const std::string kept = freeNameBeside(path);
+    writeNewFile(kept, jsonDocument(old), kPublicFileMode);
+    Dictionary description = *old.dictionary();
+    description[std::string(kStoreKey)] = url;
+    // The directory keeps others out. A service of another account reads the file.
+    replaceFile(path, jsonDocument(Value(std::move(description))), kPublicFileMode);
+    return kept;
 }
 
 Endpoint ServiceDirectory::advertisedEndpoint() const {

@@ -170,7 +170,7 @@ void SqliteStore::create(const std::string& path) {
     });
 }
 
-SqliteStore::SqliteStore(const std::string& path) {
+SqliteStore::SqliteStore(const std::string& path, StoreGuard guard) : path_(path), guard_(std::move(guard)) {
     guarded([&] {
         database_ =
             std::make_unique<SQLite::Database>(path, SQLite::OPEN_READWRITE, kBusyTimeoutMilliseconds);
@@ -181,9 +181,15 @@ SqliteStore::SqliteStore(const std::string& path) {
 
 SqliteStore::~SqliteStore() = default;
 
-std::optional<Delivery> SqliteStore::findTicket(Environment environment, const std::string& recordName) {
+template <class Work>
+auto SqliteStore::reading(Work work) {
+    if (guard_) guard_(StoreUse::reading);
     const std::lock_guard lock(mutex_);
-    return guarded([&]() -> std::optional<Delivery> {
+    return guarded(work);
+}
+
+std::optional<Delivery> SqliteStore::findTicket(Environment environment, const std::string& recordName) {
+    return reading([&]() -> std::optional<Delivery> {
         // An asset's bytes are left where they are: the answer needs their number alone.
         SQLite::Statement row(*database_,
                               "SELECT asset, length(ticket), CASE WHEN asset IS NULL THEN ticket END"
@@ -203,8 +209,7 @@ std::optional<Delivery> SqliteStore::findTicket(Environment environment, const s
 }
 
 std::optional<Data> SqliteStore::findAsset(const std::string& identifier) {
-    const std::lock_guard lock(mutex_);
-    return guarded([&]() -> std::optional<Data> {
+    return reading([&]() -> std::optional<Data> {
         SQLite::Statement row(*database_, "SELECT ticket FROM record WHERE asset = ? LIMIT 1");
         row.bind(1, identifier);
         if (!row.executeStep()) return std::nullopt;
@@ -213,8 +218,7 @@ std::optional<Data> SqliteStore::findAsset(const std::string& identifier) {
 }
 
 std::size_t SqliteStore::countRecords() {
-    const std::lock_guard lock(mutex_);
-    return guarded([&] {
+    return reading([&] {
         return static_cast<std::size_t>(database_->execAndGet("SELECT count(*) FROM record").getInt64());
     });
 }
@@ -225,6 +229,7 @@ void SqliteStore::put(Environment environment, const std::vector<SignedRecord>& 
     guarded([&] {
         // Immediate: a transaction that starts by reading cannot be upgraded behind another writer.
         SQLite::Transaction transaction(*database_, SQLite::TransactionBehavior::IMMEDIATE);
+        if (guard_) guard_(StoreUse::changing);
         std::string previous = lastEventHash(*database_);
         for (const SignedRecord& entry : records) {
             const Action action =
@@ -244,8 +249,7 @@ void SqliteStore::put(Environment environment, const std::vector<SignedRecord>& 
 }
 
 std::optional<Record> SqliteStore::find(Environment environment, const std::string& recordName) {
-    const std::lock_guard lock(mutex_);
-    return guarded([&]() -> std::optional<Record> {
+    return reading([&]() -> std::optional<Record> {
         SQLite::Statement row(*database_, std::string(kRecordColumns) + "WHERE environment = ? AND name = ?");
         row.bind(1, environmentText(environment));
         row.bind(2, recordName);
@@ -255,8 +259,7 @@ std::optional<Record> SqliteStore::find(Environment environment, const std::stri
 }
 
 std::vector<Record> SqliteStore::list(Environment environment) {
-    const std::lock_guard lock(mutex_);
-    return guarded([&] {
+    return reading([&] {
         SQLite::Statement row(*database_,
                               std::string(kRecordColumns) + "WHERE environment = ? ORDER BY name");
         row.bind(1, environmentText(environment));
@@ -267,8 +270,7 @@ std::vector<Record> SqliteStore::list(Environment environment) {
 }
 
 void SqliteStore::forEachEvent(const EventQuery& query, const std::function<void(const Event&)>& visit) {
-    const std::lock_guard lock(mutex_);
-    guarded([&] {
+    reading([&] {
         SQLite::Statement row(*database_, std::string("SELECT ") + kEventColumns +
                                               " FROM event WHERE (?1 IS NULL OR record = ?1)"
                                               " AND (?2 IS NULL OR time >= ?2) ORDER BY position");
@@ -279,8 +281,7 @@ void SqliteStore::forEachEvent(const EventQuery& query, const std::function<void
 }
 
 void SqliteStore::walkHistory(const HistoryVisitor& visitor) {
-    const std::lock_guard lock(mutex_);
-    guarded([&] {
+    reading([&] {
         const SQLite::Transaction snapshot(*database_);  // both walks see one state; rolled back at the end
         SQLite::Statement events(*database_,
                                  std::string("SELECT ") + kEventColumns + " FROM event ORDER BY position");
@@ -308,8 +309,35 @@ void SqliteStore::walkHistory(const HistoryVisitor& visitor) {
 }
 
 std::string SqliteStore::headHash() {
-    const std::lock_guard lock(mutex_);
-    return guarded([&] { return lastEventHash(*database_); });
+    return reading([&] { return lastEventHash(*database_); });
+}
+
+void SqliteStore::walkContents(const ContentsVisitor& visitor) {
+    reading([&] {
+        const SQLite::Transaction snapshot(*database_);  // rolled back at the end
+        SQLite::Statement events(*database_,
+                                 std::string("SELECT ") + kEventColumns + " FROM event ORDER BY position");
+        while (events.executeStep()) visitor.event(readEvent(events));
+
+        SQLite::Statement records(*database_,
+                                  "SELECT name, label, revoked, signed_at, asset IS NOT NULL, ticket,"
+                                  " environment FROM record ORDER BY environment, name");
+        while (records.executeStep()) {
+            const std::string text = records.getColumn(6).getString();
+            const Environment environment = parseEnvironment(text).value_or(Environment::production);
+            visitor.record(environment,
+                           {readRecord(*database_, environment, records), toData(records.getColumn(5))});
+        }
+    });
+}
+
+void SqliteStore::holdStill(const std::function<void(const std::function<void()>& confirm)>& work) {
+    guarded([&] {
+        // A connection of its own: readers go on beside a writer, also in this process.
+        SQLite::Database writer(path_, SQLite::OPEN_READWRITE, kBusyTimeoutMilliseconds);
+        const SQLite::Transaction transaction(writer, SQLite::TransactionBehavior::IMMEDIATE);
+        work([] {});
+    });
 }
 
 }  // namespace pinwell::lumora

@@ -23,7 +23,7 @@ class SqliteStore final : public RecordStore {
 
     /// Opens an existing one. A store of an earlier version is brought forward first, in one transaction; a
     /// copy of what it was stays beside it (`PATH.version-1`). Throws Failure.
-    explicit SqliteStore(const std::string& path);
+    explicit SqliteStore(const std::string& path, StoreGuard guard = {});
     ~SqliteStore() override;
 
     std::optional<Delivery> findTicket(Environment environment, const std::string& recordName) override;
@@ -36,8 +36,15 @@ class SqliteStore final : public RecordStore {
     void forEachEvent(const EventQuery& query, const std::function<void(const Event&)>& visit) override;
     void walkHistory(const HistoryVisitor& visitor) override;
     std::string headHash() override;
+    void walkContents(const ContentsVisitor& visitor) override;
+    void holdStill(const std::function<void(const std::function<void()>& confirm)>& work) override;
 
   private:
+    template <class Work>
+    auto reading(Work work);
+
+    const std::string path_;
+    const StoreGuard guard_;
     std::mutex mutex_;  // a connection's statements are not to be mixed
     std::unique_ptr<SQLite::Database> database_;
 };

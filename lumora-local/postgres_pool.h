@@ -1,0 +1,63 @@
+// A bounded set of connections to one database, shared by threads.
+#pragma once
+
+#include <condition_variable>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <vector>
+
+#include "lumora-local/postgres_connection.h"
+
+namespace pinwell::lumora {
+
+class PostgresPool {
+  public:
+    /// A connection on loan. It goes back at the end, unless it has become useless.
+    class Lease {
+      public:
+        Lease(PostgresPool& pool, std::unique_ptr<PostgresConnection> connection)
+            : pool_(&pool), connection_(std::move(connection)) {}
+        Lease(Lease&&) = default;
+        Lease& operator=(Lease&&) = delete;
+        ~Lease();
+
+        PostgresConnection& operator*() const { return *connection_; }
+        PostgresConnection* operator->() const { return connection_.get(); }
+
+        /// From discard() to keep(), the session is in the middle of something: without keep() the connection
+        /// is closed at the end.
+        void discard() noexcept { discarded_ = true; }
+        void keep() noexcept { discarded_ = false; }
+
+      private:
+        PostgresPool* pool_;
+        std::unique_ptr<PostgresConnection> connection_;
+        bool discarded_ = false;
+    };
+
+    /// Opens no connection yet.
+    PostgresPool(std::string url, std::size_t maximum) : url_(std::move(url)), maximum_(maximum) {}
+
+    /// Waits for a free connection until the deadline, or opens one, which takes five seconds at most. A
+    /// server that let an attempt wait is not tried again for as long. Throws PostgresError.
+    Lease take(Deadline deadline);
+
+    /// Closes the connections that nobody uses: after one of them turned out to be broken, all may be.
+    void closeIdle();
+
+  private:
+    std::unique_ptr<PostgresConnection> open(Deadline deadline);
+    void giveBack(std::unique_ptr<PostgresConnection> connection) noexcept;
+
+    const std::string url_;
+    const std::size_t maximum_;
+    std::mutex mutex_;
+    std::condition_variable freed_;
+    std::vector<std::unique_ptr<PostgresConnection>> idle_;
+    std::size_t inUse_ = 0;
+    Deadline notBefore_{};  // of the next attempt to connect
+    std::string lastFailure_;
+};
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,190 @@
+#include "lumora-local/postgres_rows.h"
+
+#include <algorithm>
+
+#include "foundation/byte_reader.h"
+#include "foundation/format.h"
+#include "lumora-local/failure.h"
+#include "lumora-local/sha256.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::ByteView;
+
+// Memory of a batch: this, twice for the hexadecimal form of bytes, and what libpq copies.
+constexpr std::size_t kBatchVolume = 2 * 1024 * 1024;
+
+constexpr const char* kInsertRecords =
+    "INSERT INTO record (environment, name, label, revoked, signed_at, asset, ticket)"
+    " SELECT * FROM unnest($1::text[], $2::text[], $3::bytea[], $4::boolean[], $5::bigint[], $6::text[],"
+    " $7::bytea[])";
+constexpr const char* kInsertHashes =
+    "INSERT INTO hash (environment, name, position, algorithm, hash)"
+    " SELECT * FROM unnest($1::text[], $2::text[], $3::integer[], $4::bigint[], $5::bytea[])";
+constexpr const char* kInsertEvents =
+    "INSERT INTO event (position, time, actor, action, environment, record, label, reason, comment, ticket,"
+    " previous, hash)"
+    " SELECT * FROM unnest($1::bigint[], $2::bigint[], $3::bytea[], $4::text[], $5::text[], $6::text[],"
+    " $7::bytea[], $8::text[], $9::bytea[], $10::text[], $11::text[], $12::text[])";
+
+template <class T>
+T knownName(const std::optional<T>& value, const char* column, const std::string& text) {
+    if (!value)
+        throw Failure(EX_CONFIG, foundation::format("record store: no %s is called %@", column, text));
+    return *value;
+}
+
+std::vector<CodeHash> readHashes(ByteView bytes, const std::string& name) {
+    std::vector<CodeHash> hashes;
+    try {
+        foundation::ByteReader reader(bytes);
+        while (!reader.atEnd()) {
+            const std::uint64_t algorithm = reader.be64("algorithm");
+            const std::uint32_t length = reader.be32("length of a hash");
+            hashes.push_back(
+                {static_cast<std::uint32_t>(algorithm), foundation::toData(reader.bytes(length, "hash"))});
+        }
+    } catch (const foundation::ShortRead&) {
+        throw Failure(EX_CONFIG, foundation::format("record store: the hashes of %@ are damaged", name));
+    }
+    return hashes;
+}
+
+}  // namespace
+
+std::string nameOf(Environment environment) {
+    return std::string(toString(environment));
+}
+
+Event readEvent(const PostgresRows& rows, std::size_t row) {
+    const auto text = [&](int column) { return rows.text(row, column); };
+    Event event;
+    event.time = foundation::Date{rows.integer(row, 0)};
+    event.actor = text(1);
+    event.action = knownName(parseAction(text(2)), "action", text(2));
+    event.environment = knownName(parseEnvironment(text(3)), "environment", text(3));
+    event.record = text(4);
+    event.label = text(5);
+    if (!rows.isNull(row, 6)) event.reason = knownName(parseReason(text(6)), "reason", text(6));
+    event.comment = text(7);
+    event.ticket = text(8);
+    event.previous = text(9);
+    event.hash = text(10);
+    return event;
+}
+
+Record readRecord(const PostgresRows& rows, std::size_t row) {
+    Record record;
+    record.name = rows.text(row, 0);
+    record.label = rows.text(row, 1);
+    record.revoked = rows.boolean(row, 2);
+    record.signedAt = foundation::Date{rows.integer(row, 3)};
+    record.asAsset = rows.boolean(row, 4);
+    record.hashes = readHashes(rows.bytes(row, 5), record.name);
+    return record;
+}
+
+void PostgresArray::separate() {
+    if (size_++ > 0) elements_ += ',';
+}
+
+void PostgresArray::text(std::string_view text) {
+    separate();
+    elements_ += '"';
+    for (const char c : text) {
+        if (c == '"' || c == '\\') elements_ += '\\';
+        elements_ += c;
+    }
+    elements_ += '"';
+}
+
+void PostgresArray::bytes(ByteView bytes) {
+    separate();
+    elements_ += "\"\\\\x" + foundation::toHex(bytes) + '"';
+}
+
+void PostgresArray::number(std::int64_t number) {
+    separate();
+    elements_ += std::to_string(number);
+}
+
+void PostgresArray::boolean(bool value) {
+    separate();
+    elements_ += value ? 't' : 'f';
+}
+
+void PostgresArray::null() {
+    separate();
+    elements_ += "NULL";
+}
+
+void PostgresBatch::add(Environment environment, const SignedRecord& entry) {
+    const Record& record = entry.record;
+    records_[0].text(nameOf(environment));
+    records_[1].text(record.name);
+    records_[2].bytes(record.label);
+    records_[3].boolean(record.revoked);
+    records_[4].number(record.signedAt.seconds);
+    if (record.asAsset) {
+        records_[5].text(foundation::toHex(sha256(entry.ticket)));
+    } else {
+        records_[5].null();
+    }
+    records_[6].bytes(entry.ticket);
+    volume_ += record.name.size() + record.label.size() + entry.ticket.size();
+
+    std::int64_t position = 0;
+    for (const CodeHash& hash : record.hashes) {
+        hashes_[0].text(nameOf(environment));
+        hashes_[1].text(record.name);
+        hashes_[2].number(position++);
+        hashes_[3].number(hash.algorithm);
+        hashes_[4].bytes(hash.hash);
+        volume_ += record.name.size() + hash.hash.size();
+    }
+}
+
+void PostgresBatch::add(const Event& event, std::int64_t position) {
+    events_[0].number(position);
+    events_[1].number(event.time.seconds);
+    events_[2].bytes(event.actor);
+    events_[3].text(toString(event.action));
+    events_[4].text(nameOf(event.environment));
+    events_[5].text(event.record);
+    events_[6].bytes(event.label);
+    if (event.reason) {
+        events_[7].text(toString(*event.reason));
+    } else {
+        events_[7].null();
+    }
+    events_[8].bytes(event.comment);
+    events_[9].text(event.ticket);
+    events_[10].text(event.previous);
+    events_[11].text(event.hash);
+    volume_ += event.record.size() + event.label.size() + event.comment.size() + 4 * event.hash.size();
+}
+
+bool PostgresBatch::isFull() const noexcept {
+    return volume_ >= kBatchVolume;
+}
+
+void PostgresBatch::write(PostgresConnection& connection, Deadline deadline) {
+    const auto insert = [&](const char* sql, std::vector<PostgresArray>& columns) {
+        if (columns.front().size() == 0) return;
+        std::vector<PostgresParameter> parameters;
+        for (const PostgresArray& column : columns) parameters.push_back(column.parameter());
+        connection.query(sql, parameters, deadline);
+    };
+    insert(kInsertRecords, records_);
+    insert(kInsertHashes, hashes_);
+    insert(kInsertEvents, events_);
+    *this = PostgresBatch();
+}
+
+bool canNameARecord(std::string_view name) {
+    return !name.empty() &&
+           std::all_of(name.begin(), name.end(), [](char c) { return c > ' ' && c < '\x7f'; });
+}
+
+}  // namespace pinwell::lumora

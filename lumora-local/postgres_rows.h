@@ -1,0 +1,74 @@
+// Rows of the PostgreSQL tables, in and out.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "lumora-local/postgres_connection.h"
+#include "lumora-local/record_store.h"
+
+namespace pinwell::lumora {
+
+inline constexpr const char* kPostgresEventColumns =
+    "time, actor, action, environment, record, label, reason, comment, ticket, previous, hash";
+
+/// As the tables have it.
+std::string nameOf(Environment environment);
+
+/// Of the columns above. Throws Failure (EX_CONFIG) for an action, an environment or a reason that is not
+/// one.
+Event readEvent(const PostgresRows& rows, std::size_t row);
+
+/// Columns of a record `r`; the last one holds all its hashes: of each its algorithm (8 bytes), its length
+/// (4 bytes), both big-endian, and its bytes.
+inline constexpr const char* kPostgresRecordColumns =
+    "r.name, r.label, r.revoked, r.signed_at, r.asset IS NOT NULL,"
+    " (SELECT string_agg(int8send(h.algorithm) || int4send(length(h.hash)) || h.hash, '' ORDER BY h.position)"
+    "  FROM hash h WHERE h.environment = r.environment AND h.name = r.name)";
+
+/// Of the columns above. Throws Failure (EX_CONFIG) for hashes that do not have this form.
+Record readRecord(const PostgresRows& rows, std::size_t row);
+
+/// The text form of an array parameter, element by element.
+class PostgresArray {
+  public:
+    void text(std::string_view text);
+    void bytes(foundation::ByteView bytes);
+    void bytes(std::string_view bytes) { this->bytes(foundation::asBytes(bytes)); }
+    void number(std::int64_t number);
+    void boolean(bool value);
+    void null();
+
+    std::size_t size() const noexcept { return size_; }
+    PostgresParameter parameter() const { return {"{" + elements_ + "}"}; }
+
+  private:
+    void separate();
+
+    std::string elements_;
+    std::size_t size_ = 0;
+};
+
+/// Many records or events for one statement each.
+class PostgresBatch {
+  public:
+    void add(Environment environment, const SignedRecord& entry);
+    void add(const Event& event, std::int64_t position);
+
+    /// Worth a round trip to the server.
+    bool isFull() const noexcept;
+
+    /// Writes what was added, within the caller's transaction, and forgets it. Throws PostgresError.
+    void write(PostgresConnection& connection, Deadline deadline);
+
+  private:
+    std::vector<PostgresArray> records_{7};
+    std::vector<PostgresArray> hashes_{5};
+    std::vector<PostgresArray> events_{12};
+    std::size_t volume_ = 0;
+};
+
+/// What a record's name is made of: printable ASCII. No other text names a record of this store.
+bool canNameARecord(std::string_view name);
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,90 @@
+#include "lumora-local/postgres_schema.h"
+
+#include <array>
+#include <string>
+
+namespace pinwell::lumora {
+namespace {
+
+// Makes the upgrades of several instances take turns. Nothing else in the database should use this number.
+constexpr const char* kTakeTurns = "SELECT pg_advisory_xact_lock(7526467402843185714)";
+
+constexpr const char* kVersionTable = R"(
+    CREATE SCHEMA IF NOT EXISTS lumora;
+    CREATE TABLE IF NOT EXISTS lumora.store (
+        only_row boolean PRIMARY KEY DEFAULT true CHECK (only_row),
+        version  integer NOT NULL,
+        records  bigint NOT NULL       -- how many there are: counting ten million takes seconds
+    );
+    INSERT INTO lumora.store (version, records) SELECT 0, 0 WHERE NOT EXISTS (SELECT 1 FROM lumora.store);
+)";
+
+// From each version to the next. Tickets are mostly signatures, which no compression makes smaller.
+constexpr std::array<const char*, kPostgresVersion> kSteps{R"(
+    CREATE TABLE record (
+        environment text COLLATE "C" NOT NULL,
+        name        text COLLATE "C" NOT NULL,
+        label       bytea NOT NULL,
+        revoked     boolean NOT NULL,
+        signed_at   bigint NOT NULL,     -- seconds since 1970-01-01 UTC
+        asset       text COLLATE "C",    -- identifier of the asset; NULL: the ticket is delivered inline
+        ticket      bytea NOT NULL CHECK (length(ticket) > 0),
+        PRIMARY KEY (environment, name)
+    );
+    ALTER TABLE record ALTER COLUMN ticket SET STORAGE EXTERNAL;
+    CREATE INDEX record_by_asset ON record (asset) WHERE asset IS NOT NULL;
+    CREATE TABLE hash (
+        environment text COLLATE "C" NOT NULL,
+        name        text COLLATE "C" NOT NULL,
+        position    integer NOT NULL,
+        algorithm   bigint NOT NULL,
+        hash        bytea NOT NULL,
+        PRIMARY KEY (environment, name, position),
+        FOREIGN KEY (environment, name) REFERENCES record (environment, name) ON DELETE CASCADE
+    );
+    CREATE INDEX hash_by_bytes ON hash (environment, hash);
+    CREATE TABLE event (
+        position    bigint PRIMARY KEY,
+        time        bigint NOT NULL,     -- seconds since 1970-01-01 UTC
+        actor       bytea NOT NULL,
+        action      text COLLATE "C" NOT NULL,
+        environment text COLLATE "C" NOT NULL,
+        record      text COLLATE "C" NOT NULL,
+        label       bytea NOT NULL,
+        reason      text COLLATE "C",    -- of a revocation
+        comment     bytea NOT NULL,
+        ticket      text COLLATE "C" NOT NULL,    -- SHA-256 in hexadecimal
+        previous    text COLLATE "C" NOT NULL UNIQUE,
+        hash        text COLLATE "C" NOT NULL UNIQUE
+    );
+    CREATE INDEX event_by_record ON event (environment, record, position);
+    -- The triggers stop mistakes; the chain of hashes shows intent.
+    CREATE FUNCTION events_stay() RETURNS trigger LANGUAGE plpgsql AS
+        $$ BEGIN RAISE EXCEPTION 'events are never changed and never removed'; END $$;
+    CREATE TRIGGER events_stay BEFORE UPDATE OR DELETE OR TRUNCATE ON event
+        FOR EACH STATEMENT EXECUTE FUNCTION events_stay();
+)"};
+
+constexpr const char* kExists = "SELECT to_regclass('lumora.store') IS NOT NULL";
+constexpr const char* kVersion = "SELECT version FROM lumora.store";
+
+}  // namespace
+
+std::optional<int> postgresVersion(PostgresConnection& connection, Deadline deadline) {
+    if (!connection.query(kExists, {}, deadline).boolean(0, 0)) return std::nullopt;
+    const PostgresRows rows = connection.query(kVersion, {}, deadline);
+    if (rows.size() == 0) return 0;
+    return static_cast<int>(rows.integer(0, 0));
+}
+
+void upgradePostgresSchema(PostgresConnection& connection, Deadline deadline) {
+    connection.execute(kTakeTurns, deadline);
+    int version = postgresVersion(connection, deadline).value_or(0);
+    if (version == 0) connection.execute(kVersionTable, deadline);
+    for (; version >= 0 && version < kPostgresVersion; ++version) {
+        connection.execute(kSteps.at(static_cast<std::size_t>(version)), deadline);
+    }
+    connection.execute("UPDATE lumora.store SET version = " + std::to_string(version), deadline);
+}
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,458 @@
+#include "lumora-local/postgres_store.h"
+
+#include <algorithm>
+#include <chrono>
+#include <thread>
+
+#include "foundation/format.h"
+#include "lumora-local/failure.h"
+#include "lumora-local/postgres_rows.h"
+#include "lumora-local/postgres_schema.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::Data;
+using foundation::format;
+using std::chrono::milliseconds;
+using Clock = std::chrono::steady_clock;
+
+constexpr std::chrono::seconds kReadingTime{5};
+constexpr std::chrono::seconds kChangingTime{20};
+constexpr std::chrono::seconds kUpgradeTime{600};
+constexpr milliseconds kSilence{120'000};  // between two rows of a walk; the first may have to be sorted
+constexpr milliseconds kPauseBeforeTryingAgain{100};
+
+constexpr const char* kLockStore = "SELECT version FROM store FOR UPDATE";
+constexpr const char* kBeginChange = "BEGIN ISOLATION LEVEL READ COMMITTED READ WRITE";
+constexpr const char* kBeginWalk =
+    "BEGIN ISOLATION LEVEL REPEATABLE READ READ ONLY; SET LOCAL statement_timeout = 0";
+constexpr const char* kLastEvent = "SELECT hash, position FROM event ORDER BY position DESC LIMIT 1";
+
+int exitStatusFor(const PostgresError& error) {
+    const std::string& state = error.state();
+    if (error.lost() || state.starts_with("53") || state.starts_with("40") || state == "55P03" ||
+        state == "57014") {
+        return EX_TEMPFAIL;  // gone, out of a resource, in another transaction's way, too slow
+    }
+    if (state == "42501") return EX_NOPERM;
+    if (state.starts_with("22") || state.starts_with("23")) return EX_DATAERR;
+    if (state.starts_with("42") || state.starts_with("3F")) return EX_CONFIG;
+    return EX_IOERR;
+}
+
+Failure asFailure(const PostgresError& error) {
+    return {exitStatusFor(error), format("record store: %@", std::string_view(error.what()))};
+}
+
+Failure cannotUse(const PostgresPlace& place, std::string_view why) {
+    return {EX_CONFIG, format("%@: %@", place.named, why)};
+}
+
+/// Holds the store's lock from here to the end of the caller's transaction.
+void lockStore(PostgresConnection& connection, Deadline deadline) {
+    const PostgresRows rows = connection.query(kLockStore, {}, deadline);
+    const std::int64_t version = rows.size() == 1 ? rows.integer(0, 0) : 0;
+    if (version != kPostgresVersion) {
+        throw Failure(EX_CONFIG, format("the record store has become one of version %lld; this program knows "
+                                        "versions up to %d",
+                                        static_cast<long long>(version), kPostgresVersion));
+    }
+}
+
+struct Head {
+    std::string hash = hashBeforeTheFirstEvent();
+    std::int64_t position = 0;
+};
+
+Head lastEventOf(PostgresConnection& connection, Deadline deadline) {
+    const PostgresRows rows = connection.query(kLastEvent, {}, deadline);
+    if (rows.size() == 0) return {};
+    return {rows.text(0, 0), rows.integer(0, 1)};
+}
+
+std::optional<bool> isRevoked(PostgresConnection& connection, Environment environment,
+                              const std::string& name, Deadline deadline) {
+    const PostgresRows rows =
+        connection.query("SELECT revoked FROM record WHERE environment = $1 AND name = $2",
+                         {nameOf(environment), name}, deadline);
+    if (rows.size() == 0) return std::nullopt;
+    return rows.boolean(0, 0);
+}
+
+/// The same rule as the embedded store's: a hash counts under any name and algorithm, and the other hashes of
+/// a revoked artefact count if one is to have a ticket of its own.
+std::optional<std::string> revokedBeside(PostgresConnection& connection, Environment environment,
+                                         const Record& record, Deadline deadline) {
+    if (record.hashes.empty()) return std::nullopt;
+    PostgresArray hashes;
+    for (const CodeHash& hash : record.hashes) hashes.bytes(hash.hash);
+    const PostgresRows rows = connection.query(
+        "SELECT r.name FROM hash h JOIN record r ON r.environment = h.environment AND r.name = h.name"
+        " WHERE h.environment = $1 AND r.name <> $2 AND r.revoked AND h.hash = ANY ($3::bytea[])"
+        " AND (h.hash = $4 OR h.position = 0) ORDER BY r.name LIMIT 1",
+        {nameOf(environment), record.name, hashes.parameter(),
+         PostgresParameter::bytes(record.hashes.front().hash)},
+        deadline);
+    if (rows.size() == 0) return std::nullopt;
+    return rows.text(0, 0);
+}
+
+void requireName(const std::string& name) {
+    if (!canNameARecord(name)) throw Failure(EX_DATAERR, format("%@ is not the name of a record", name));
+}
+
+/// Refuses a server that the role cannot use.
+void checkServer(PostgresConnection& connection, const PostgresPlace& place) {
+    const std::string encoding = connection.setting("server_encoding");
+    if (encoding != "UTF8") {
+        throw cannotUse(place, format("the database's encoding is %@, not UTF8", encoding));
+    }
+    if (!place.forLookups && connection.setting("in_hot_standby") == "on") {
+        throw cannotUse(place,
+                        "the database is a replica, which cannot be written; it fits \"role\": \"lookup\"");
+    }
+}
+
+void bringForward(PostgresConnection& connection, const PostgresPlace& place) {
+    const Deadline deadline = Clock::now() + kUpgradeTime;
+    const std::optional<int> version = postgresVersion(connection, deadline);
+    if (!version) {
+        throw cannotUse(place, "the database has no record store; make one with lumora-local migrate");
+    }
+    if (*version == kPostgresVersion) return;
+    if (*version > kPostgresVersion || *version < 0) {
+        throw cannotUse(place, format("record store of version %d; this program knows versions 1 to %d",
+                                      *version, kPostgresVersion));
+    }
+    if (place.forLookups) {
+        throw cannotUse(place,
+                        format("record store of version %d; a service whose role is not lookup brings it "
+                               "to version %d",
+                               *version, kPostgresVersion));
+    }
+    connection.execute(kBeginChange, deadline);
+    connection.execute("SET LOCAL statement_timeout = 0", deadline);
+    upgradePostgresSchema(connection, deadline);
+    connection.execute("COMMIT", deadline);
+}
+
+}  // namespace
+
+void PostgresStore::create(const PostgresPlace& place,
+                           const std::function<void(const ContentsVisitor&)>& pour) {
+    const auto soon = [] { return Clock::now() + kUpgradeTime; };
+    try {
+        PostgresConnection connection(place.url, Clock::now() + kReadingTime);
+        checkServer(connection, place);
+        if (postgresVersion(connection, soon()).value_or(0) > kPostgresVersion) {
+            bringForward(connection, place);  // says so
+        }
+        connection.execute(kBeginChange, soon());
+        connection.execute(
+            "SET LOCAL statement_timeout = 0; SET LOCAL lock_timeout = 0;"
+            " SET LOCAL idle_in_transaction_session_timeout = 0",
+            soon());
+        upgradePostgresSchema(connection, soon());
+        lockStore(connection, soon());
+        if (connection
+                .query("SELECT EXISTS (SELECT 1 FROM record) OR EXISTS (SELECT 1 FROM event)", {}, soon())
+                .boolean(0, 0)) {
+            throw Failure(EX_CANTCREAT,
+                          format("%@: the database has a record store that is not empty", place.named));
+        }
+        PostgresBatch batch;
+        std::int64_t events = 0;
+        std::int64_t records = 0;
+        const auto writeIf = [&](bool wanted) {
+            if (wanted) batch.write(connection, soon());
+        };
+        if (pour) {
+            pour({.event =
+                      [&](const Event& event) {
+                          requireName(event.record);
+                          batch.add(event, ++events);
+                          writeIf(batch.isFull());
+                      },
+                  .record =
+                      [&](Environment environment, const SignedRecord& entry) {
+                          requireName(entry.record.name);
+                          batch.add(environment, entry);
+                          ++records;
+                          writeIf(batch.isFull());
+                      }});
+        }
+        writeIf(true);
+        connection.query("UPDATE store SET records = $1", {records}, soon());
+        connection.execute("COMMIT", soon());
+    } catch (const PostgresError& error) {
+        throw cannotUse(place, error.what());
+    }
+}
+
+PostgresStore::PostgresStore(PostgresPlace place, StoreGuard guard)
+    : place_(std::move(place)), guard_(std::move(guard)), pool_(place_.url, place_.connections) {
+    try {
+        const auto connection = pool_.take(Clock::now() + kReadingTime);
+        checkServer(*connection, place_);
+        bringForward(*connection, place_);
+    } catch (const PostgresError& error) {
+        throw cannotUse(place_, error.what());
+    }
+}
+
+PostgresStore::~PostgresStore() = default;
+
+/// Runs work that changes nothing. A connection that was idle may have been lost long ago: then once more,
+/// on a new one.
+template <class Work>
+auto PostgresStore::reading(Work work) {
+    if (guard_) guard_(StoreUse::reading);
+    const Deadline deadline = Clock::now() + kReadingTime;
+    for (bool again = false;; again = true) {
+        try {
+            const auto connection = pool_.take(deadline);
+            return work(*connection, deadline);
+        } catch (const PostgresError& error) {
+            if (!error.lost() || again) throw asFailure(error);
+            pool_.closeIdle();
+        }
+    }
+}
+
+/// Runs work that reads one state of the store for as long as it takes.
+template <class Work>
+void PostgresStore::walking(Work work) {
+    if (guard_) guard_(StoreUse::reading);
+    try {
+        auto connection = pool_.take(Clock::now() + kReadingTime);
+        connection.discard();
+        connection->execute(kBeginWalk, Clock::now() + kReadingTime);
+        work(*connection);
+        connection->execute("COMMIT", Clock::now() + kReadingTime);
+        connection.keep();
+    } catch (const PostgresError& error) {
+        pool_.closeIdle();
+        throw asFailure(error);
+    }
+}
+
+std::optional<Delivery> PostgresStore::findTicket(Environment environment, const std::string& recordName) {
+    if (!canNameARecord(recordName)) return std::nullopt;
+    return reading([&](PostgresConnection& connection, Deadline deadline) -> std::optional<Delivery> {
+        // An asset's bytes are left where they are: the answer needs their number alone.
+        const PostgresRows rows = connection.query(
+            "SELECT asset, length(ticket), CASE WHEN asset IS NULL THEN ticket END"
+            " FROM record WHERE environment = $1 AND name = $2",
+            {nameOf(environment), recordName}, deadline);
+        if (rows.size() == 0) return std::nullopt;
+        Delivery delivery;
+        if (rows.isNull(0, 0)) {
+            delivery.inlineTicket = foundation::toData(rows.bytes(0, 2));
+        } else {
+            delivery.asset = Delivery::Asset{rows.text(0, 0), static_cast<std::uint64_t>(rows.integer(0, 1))};
+        }
+        return delivery;
+    });
+}
+
+std::optional<Data> PostgresStore::findAsset(const std::string& identifier) {
+    if (!canNameARecord(identifier)) return std::nullopt;
+    return reading([&](PostgresConnection& connection, Deadline deadline) -> std::optional<Data> {
+        const PostgresRows rows =
+            connection.query("SELECT ticket FROM record WHERE asset = $1 LIMIT 1", {identifier}, deadline);
+        if (rows.size() == 0) return std::nullopt;
+        return foundation::toData(rows.bytes(0, 0));
+    });
+}
+
+std::size_t PostgresStore::countRecords() {
+    return reading([&](PostgresConnection& connection, Deadline deadline) {
+        const PostgresRows rows = connection.query("SELECT records FROM store", {}, deadline);
+        return rows.size() == 1 ? static_cast<std::size_t>(rows.integer(0, 0)) : 0;
+    });
+}
+
+void PostgresStore::put(Environment environment, const std::vector<SignedRecord>& records,
+                        const Occasion& occasion) {
+    for (const SignedRecord& entry : records) requireName(entry.record.name);
+    const Deadline deadline = Clock::now() + kChangingTime;
+    for (;;) {
+        try {
+            const std::string doubtful = putOnce(environment, records, occasion, deadline);
+            if (doubtful.empty() || wasCommitted(doubtful, deadline)) return;
+        } catch (const PostgresError& error) {
+            // Nothing was committed: the transaction did not come so far.
+            const bool another = error.lost() || error.state().starts_with("40");
+            if (!another || Clock::now() + kPauseBeforeTryingAgain >= deadline) throw asFailure(error);
+            pool_.closeIdle();
+        }
+        std::this_thread::sleep_for(kPauseBeforeTryingAgain);
+    }
+}
+
+/// Empty if the change was committed. If the connection was lost during the commit, the hash of the last
+/// event, by which wasCommitted() finds out.
+std::string PostgresStore::putOnce(Environment environment, const std::vector<SignedRecord>& records,
+                                   const Occasion& occasion, Deadline deadline) {
+    auto lease = pool_.take(deadline);
+    PostgresConnection& connection = *lease;
+    lease.discard();
+    connection.execute(kBeginChange, deadline);
+    lockStore(connection, deadline);
+    if (guard_) guard_(StoreUse::changing);
+    Head head = lastEventOf(connection, deadline);
+    std::int64_t added = 0;
+    PostgresBatch batch;
+    for (const SignedRecord& entry : records) {
+        const std::optional<bool> before = isRevoked(connection, environment, entry.record.name, deadline);
+        const Action action = actionOf(entry.record, before, occasion);
+        if (!entry.record.revoked && !occasion.reinstates)
+            if (const auto other = revokedBeside(connection, environment, entry.record, deadline))
+                refuseToGetAround(entry.record, *other);
+        if (before) {
+            connection.query("DELETE FROM record WHERE environment = $1 AND name = $2",
+                             {nameOf(environment), entry.record.name}, deadline);
+        } else {
+            ++added;
+        }
+        const Event event = makeEvent(environment, entry, action, occasion, std::move(head.hash));
+        batch.add(environment, entry);
+        batch.add(event, ++head.position);
+        batch.write(connection, deadline);
+        head.hash = event.hash;
+    }
+    connection.query("UPDATE store SET records = records + $1", {added}, deadline);
+    // From here on the server decides alone: a statement's time limit would cut short its wait for a replica
+    // that is to have the change too.
+    connection.execute("SET LOCAL statement_timeout = 0", deadline);
+    try {
+        connection.execute("COMMIT", deadline);
+    } catch (const PostgresError& error) {
+        if (!error.lost()) throw;
+        return head.hash;
+    }
+    lease.keep();
+    return {};
+}
+
+bool PostgresStore::wasCommitted(const std::string& eventHash, Deadline deadline) {
+    for (;;) {
+        pool_.closeIdle();
+        try {
+            auto connection = pool_.take(deadline);
+            connection.discard();
+            connection->execute(kBeginChange, deadline);
+            // Who has the lock knows that the earlier transaction is over.
+            lockStore(*connection, deadline);
+            return connection->query("SELECT 1 FROM event WHERE hash = $1", {eventHash}, deadline).size() > 0;
+        } catch (const PostgresError& error) {
+            if (Clock::now() + kPauseBeforeTryingAgain >= deadline) {
+                throw Failure(
+                    EX_TEMPFAIL,
+                    format("record store: the database was lost during the commit (%@); whether the "
+                           "change was made is not known: lumora-local log shows it",
+                           std::string_view(error.what())));
+            }
+        }
+        std::this_thread::sleep_for(kPauseBeforeTryingAgain);
+    }
+}
+
+std::optional<Record> PostgresStore::find(Environment environment, const std::string& recordName) {
+    if (!canNameARecord(recordName)) return std::nullopt;
+    static const std::string sql = std::string("SELECT ") + kPostgresRecordColumns +
+                                   " FROM record r WHERE r.environment = $1 AND r.name = $2";
+    return reading([&](PostgresConnection& connection, Deadline deadline) -> std::optional<Record> {
+        const PostgresRows rows = connection.query(sql.c_str(), {nameOf(environment), recordName}, deadline);
+        if (rows.size() == 0) return std::nullopt;
+        return readRecord(rows, 0);
+    });
+}
+
+std::vector<Record> PostgresStore::list(Environment environment) {
+    static const std::string sql = std::string("SELECT ") + kPostgresRecordColumns +
+                                   " FROM record r WHERE r.environment = $1 ORDER BY r.name";
+    std::vector<Record> records;
+    walking([&](PostgresConnection& connection) {
+        connection.forEachRow(sql.c_str(), {nameOf(environment)}, kSilence,
+                              [&](const PostgresRows& rows) { records.push_back(readRecord(rows, 0)); });
+    });
+    return records;
+}
+
+void PostgresStore::forEachEvent(const EventQuery& query, const std::function<void(const Event&)>& visit) {
+    if (query.record && !canNameARecord(*query.record)) return;
+    static const std::string sql = std::string("SELECT ") + kPostgresEventColumns +
+                                   " FROM event WHERE ($1::text IS NULL OR record = $1)"
+                                   " AND ($2::bigint IS NULL OR time >= $2) ORDER BY position";
+    const PostgresParameter since =
+        query.since ? PostgresParameter(query.since->seconds) : PostgresParameter(std::nullopt);
+    walking([&](PostgresConnection& connection) {
+        connection.forEachRow(sql.c_str(), {query.record, since}, kSilence,
+                              [&](const PostgresRows& rows) { visit(readEvent(rows, 0)); });
+    });
+}
+
+void PostgresStore::walkHistory(const HistoryVisitor& visitor) {
+    static const std::string events =
+        std::string("SELECT ") + kPostgresEventColumns + " FROM event ORDER BY position";
+    constexpr const char* kStates =
+        "SELECT r.environment, r.name, encode(sha256(r.ticket), 'hex'), r.revoked, e.ticket, e.action"
+        " FROM record r LEFT JOIN LATERAL (SELECT ticket, action FROM event"
+        " WHERE environment = r.environment AND record = r.name ORDER BY position DESC LIMIT 1) e ON true";
+    walking([&](PostgresConnection& connection) {
+        connection.forEachRow(events.c_str(), {}, kSilence,
+                              [&](const PostgresRows& rows) { visitor.event(readEvent(rows, 0)); });
+        connection.forEachRow(kStates, {}, kSilence, [&](const PostgresRows& rows) {
+            RecordState state;
+            state.environment = parseEnvironment(rows.text(0, 0)).value_or(Environment::production);
+            state.name = rows.text(0, 1);
+            state.ticket = rows.text(0, 2);
+            state.revoked = rows.boolean(0, 3);
+            if (!rows.isNull(0, 4)) {
+                state.lastTicket = rows.text(0, 4);
+                state.lastAction = parseAction(rows.text(0, 5));
+            }
+            visitor.record(state);
+        });
+    });
+}
+
+std::string PostgresStore::headHash() {
+    return reading([](PostgresConnection& connection, Deadline deadline) {
+        return lastEventOf(connection, deadline).hash;
+    });
+}
+
+void PostgresStore::walkContents(const ContentsVisitor& visitor) {
+    static const std::string events =
+        std::string("SELECT ") + kPostgresEventColumns + " FROM event ORDER BY position";
+    static const std::string records =
+        std::string("SELECT ") + kPostgresRecordColumns +
+        ", r.ticket, r.environment FROM record r ORDER BY r.environment, r.name";
+    walking([&](PostgresConnection& connection) {
+        connection.forEachRow(events.c_str(), {}, kSilence,
+                              [&](const PostgresRows& rows) { visitor.event(readEvent(rows, 0)); });
+        connection.forEachRow(records.c_str(), {}, kSilence, [&](const PostgresRows& rows) {
+            visitor.record(parseEnvironment(rows.text(0, 7)).value_or(Environment::production),
+                           {readRecord(rows, 0), foundation::toData(rows.bytes(0, 6))});
+        });
+    });
+}
+
+void PostgresStore::holdStill(const std::function<void(const std::function<void()>& confirm)>& work) {
+    try {
+        const auto soon = [] { return Clock::now() + kChangingTime; };
+        auto connection = pool_.take(soon());
+        connection.discard();
+        connection->execute(kBeginChange, soon());
+        connection->execute("SET LOCAL idle_in_transaction_session_timeout = 0", soon());
+        lockStore(*connection, soon());
+        work([&] { connection->execute("SELECT 1", soon()); });
+    } catch (const PostgresError& error) {
+        throw asFailure(error);
+    }
+}
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,64 @@
+// A record store in a PostgreSQL database, which several services share.
+//
+// A database that goes away costs the calls that need it, and nothing else: each call finds a connection
+// anew, and fails with EX_TEMPFAIL after a bounded time. put() returns only if the server has the change on
+// its disk; if a connection is lost during the commit, the store asks the next one what became of it.
+#pragma once
+
+#include <functional>
+#include <memory>
+#include <string>
+
+#include "lumora-local/postgres_pool.h"
+#include "lumora-local/record_store.h"
+
+namespace pinwell::lumora {
+
+struct PostgresPlace {
+    std::string url;              // "postgresql://...", as libpq reads it
+    std::string named;            // for messages: the file and the key that name it
+    bool forLookups = false;      // the server may be a replica that cannot be written
+    std::size_t connections = 8;  // at most
+};
+
+class PostgresStore final : public RecordStore {
+  public:
+    /// Makes a store in a database that has none, and fills it with what `pour` hands over, in one
+    /// transaction. Throws Failure: EX_CONFIG if the database cannot be used, EX_CANTCREAT if it has records
+    /// or events already.
+    static void create(const PostgresPlace& place,
+                       const std::function<void(const ContentsVisitor&)>& pour = {});
+
+    /// Opens a store that exists. One of an earlier version is brought forward first, in one transaction.
+    /// Throws Failure (EX_CONFIG) that names the place.
+    explicit PostgresStore(PostgresPlace place, StoreGuard guard = {});
+    ~PostgresStore() override;
+
+    std::optional<Delivery> findTicket(Environment environment, const std::string& recordName) override;
+    std::optional<foundation::Data> findAsset(const std::string& identifier) override;
+    std::size_t countRecords() override;
+    void put(Environment environment, const std::vector<SignedRecord>& records,
+             const Occasion& occasion) override;
+    std::optional<Record> find(Environment environment, const std::string& recordName) override;
+    std::vector<Record> list(Environment environment) override;
+    void forEachEvent(const EventQuery& query, const std::function<void(const Event&)>& visit) override;
+    void walkHistory(const HistoryVisitor& visitor) override;
+    std::string headHash() override;
+    void walkContents(const ContentsVisitor& visitor) override;
+    void holdStill(const std::function<void(const std::function<void()>& confirm)>& work) override;
+
+  private:
+    template <class Work>
+    auto reading(Work work);
+    template <class Work>
+    void walking(Work work);
+    std::string putOnce(Environment environment, const std::vector<SignedRecord>& records,
+                        const Occasion& occasion, Deadline deadline);
+    bool wasCommitted(const std::string& eventHash, Deadline deadline);
+
+    const PostgresPlace place_;
+    const StoreGuard guard_;
+    PostgresPool pool_;
+};
+
+}  // namespace pinwell::lumora

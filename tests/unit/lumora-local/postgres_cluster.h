@@ -1,0 +1,62 @@
+// A PostgreSQL cluster of a test's own: real programs, a socket in the test's folder, no TCP.
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "support/process.h"
+#include "support/temporary_directory.h"
+
+namespace pinwell::lumora::test {
+
+class PostgresCluster {
+  public:
+    /// Why there can be no cluster here; `nullopt` if there can be one.
+    static std::optional<std::string> missing();
+
+    /// The cluster that the tests of a program share, started when it is first asked for.
+    static PostgresCluster& shared();
+
+    /// Makes a cluster with the newest release that is installed, and starts it. The superuser makes it as
+    /// the user `nobody`, because PostgreSQL refuses to run as the superuser. Throws std::runtime_error.
+    PostgresCluster();
+
+    struct ReplicaOf {
+        const PostgresCluster& primary;
+    };
+    /// A cluster that follows another one, and cannot be written.
+    explicit PostgresCluster(ReplicaOf origin);
+
+    ~PostgresCluster();
+    PostgresCluster(const PostgresCluster&) = delete;
+    PostgresCluster& operator=(const PostgresCluster&) = delete;
+
+    /// Makes an empty database. Returns its URL.
+    std::string makeDatabase(const std::string& options = "");
+
+    /// The URL of a database by its name.
+    std::string url(const std::string& database) const;
+
+    /// Runs SQL in a database, as the cluster's superuser; returns the fields, a row a line.
+    std::string sql(const std::string& url, const std::string& statements) const;
+
+    /// Starts the server again, and waits until it answers.
+    void start();
+
+    /// Ends it at once, as a power cut would as far as the database can see: no transaction is finished.
+    void stopImmediately();
+
+    std::string socketDirectory() const { return directory_ / "socket"; }
+    std::string path() const { return directory_ / "data"; }
+
+  private:
+    pinwell::test::Command asOwner(const std::string& program, std::vector<std::string> arguments) const;
+    void makeFolders();
+
+    pinwell::test::TemporaryDirectory directory_;
+    std::unique_ptr<pinwell::test::RunningProcess> server_;
+    int databases_ = 0;
+};
+
+}  // namespace pinwell::lumora::test
