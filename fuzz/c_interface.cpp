@@ -1,7 +1,8 @@
 // The C interface, as a program that got a file from somebody calls it: every function, on an artefact one
 // file of which is the input, and on handles that were freed.
 //
-// The first byte of the input says which file that is; the rest are its bytes.
+// The first byte of the input says which file that is; the rest are its bytes. Or it says that the rest are
+// certificates, or a hash.
 #include <pinwell/ticket_c.h>
 #include <sys/stat.h>
 
@@ -9,6 +10,7 @@
 #include <cstring>
 #include <filesystem>
 #include <string>
+#include <vector>
 
 #include "support/temporary_directory.h"
 #include "target.h"
@@ -139,6 +141,27 @@ void examineRoots(ByteView input) {
     pinwell_roots_free(made);
 }
 
+/// The input is a digest type, the size of a buffer, and a hash.
+void examineRecordName(ByteView input) {
+    constexpr std::size_t kFields = 2;
+    if (input.size() < kFields) return;
+    const auto digestType = std::to_integer<std::uint32_t>(input[0]);
+    const auto bufferSize = std::to_integer<std::size_t>(input[1]);
+    const ByteView hash = input.subspan(kFields);
+    std::vector<char> buffer(bufferSize, '?');
+    std::size_t length = 0;
+    const pinwell_status status = pinwell_record_name(digestType, hash.data(), hash.size(), buffer.data(),
+                                                      buffer.size(), &length, nullptr);
+    const bool isHash = !hash.empty() && hash.size() <= 64;
+    require((status == PINWELL_ERROR_ARGUMENT) == !isHash, "a hash has 1 to 64 bytes");
+    if (!isHash) return;
+    require(length < PINWELL_RECORD_NAME_SIZE, "every name has room in the size that is said to do");
+    require((status == PINWELL_OK) == (length < bufferSize), "a name is written if there is room");
+    if (status == PINWELL_OK)
+        require(std::strlen(buffer.data()) == length && length > 2 * hash.size(),
+                "a name has all of the hash");
+}
+
 /// Puts the input in a file's place, and back what was there.
 class Replaced {
   public:
@@ -169,8 +192,10 @@ void examine(ByteView input) {
     if (input.empty()) return;
     const auto selector = std::to_integer<std::size_t>(input.front());
     const ByteView rest = input.subspan(1);
-    if (selector % (kPlaces.size() + 1) == kPlaces.size()) return examineRoots(rest);
-    const Place& place = kPlaces[selector % (kPlaces.size() + 1)];
+    const std::size_t choice = selector % (kPlaces.size() + 2);
+    if (choice == kPlaces.size()) return examineRoots(rest);
+    if (choice > kPlaces.size()) return examineRecordName(rest);
+    const Place& place = kPlaces[choice];
     const std::string contents = foundation::toString(rest);
     const Replaced replaced(folder() / place.file, contents);
     const std::string path = folder() / place.artefact;

@@ -15,6 +15,8 @@
 #include "support/disk_image_builder.h"
 #include "support/executable_image_builder.h"
 #include "support/package_builder.h"
+#include "support/signed_image.h"
+#include "support/tabled_image_builder.h"
 #include "support/temporary_directory.h"
 #include "support/ticket_builder.h"
 
@@ -271,6 +273,94 @@ void makeDocuments(const std::string& corpus) {
         .add("root", TicketChain().issue().root.pem());
 }
 
+void makeSignedExecutables(const std::string& corpus) {
+    const Data adHoc = signedImageOf({});
+    const Data intel = signedImageOf({.cpuType = kSampleX86});
+    Seeds(corpus, "verify_executable")
+        .add("ad_hoc", adHoc)
+        .add("entitlements", signedImageOf({.components = {{5, makeBlob(0xFADE7171, Data(20))}}}))
+        .add("directories", signedImageOf({.digestTypes = {1, 2, 4}, .team = "TEAM42"}))
+        .add("signer", signedImageOf({.hasSigner = true}))
+        .add("timestamp", signedImageOf({.digestTypes = {1, 2}, .hasSigner = true, .hasTimestamp = true}))
+        .add("padding", signedImageOf({.padding = Data(16)}))
+        .add("unsigned", ExecutableImageBuilder().withoutSignature().build())
+        .add("other_code", ExecutableImageBuilder().build())
+        .add("universal", UniversalImageBuilder().slice(kSampleX86, intel).slice(kSampleArm, adHoc).build());
+}
+
+/// The first byte says what the rest is (fuzz/verify_disk_image.cpp).
+void makeVerifiedDiskImages(const std::string& corpus) {
+    const std::string artefacts = VECTORS_DIRECTORY "/artefacts/";
+    Seeds seeds(corpus, "verify_disk_image");
+    const auto image = [&](const std::string& name) {
+        return std::string(1, '\0') + readFile(artefacts + name);
+    };
+    seeds.add("image", image("Sample.dmg"))
+        .add("image_bare", image("bare/Sample.dmg"))
+        .add("image_unsigned", image("Unsigned.dmg"));
+    const Data some(2048, std::byte{0x5A});
+    const auto table = [](const TabledImageBuilder& builder) {
+        return foundation::ByteWriter()
+            .u8(1)
+            .be16(static_cast<std::uint16_t>(builder.table().size()))
+            .bytes(builder.table())
+            .bytes(builder.data())
+            .data();
+    };
+    seeds.add("table_plain", table(TabledImageBuilder().plain(some)))
+        .add("table_zlib", table(TabledImageBuilder().zlib(some).zeros(3)))
+        .add("table_all", table(TabledImageBuilder().plain(some).zeros(10'000).zlib(some).plain(some)))
+        .add("table_shared", table(TabledImageBuilder().plain(some).again(4, 2048)));
+}
+
+/// The first byte says what the rest is (fuzz/verify_package.cpp).
+void makeVerifiedPackages(const std::string& corpus) {
+    const std::string artefacts = VECTORS_DIRECTORY "/artefacts/";
+    const auto file = [](const std::string& name, const std::string& inside) {
+        return "<file id=\"1\"><name>" + name + "</name>" + inside + "</file>";
+    };
+    const std::string data =
+        "<data><offset>20</offset><length>4</length><archived-checksum style=\"sha1\">"
+        "a17c9aaa61e80a1bf71d0d850af4e5baa9800bbd</archived-checksum></data>";  // of "data"
+    const auto table = [&](const std::string& files) {
+        return "\1<xar><toc><checksum style=\"sha1\"><offset>0</offset><size>20</size></checksum>" + files +
+               "</toc></xar>data";
+    };
+    Seeds(corpus, "verify_package")
+        .add("stapled", std::string(1, '\0') + readFile(artefacts + "Sample.pkg"))
+        .add("bare", std::string(1, '\0') + readFile(artefacts + "bare/Sample.pkg"))
+        .add("table", table(file("a", data)))
+        .add("table_folders", table(file("d", file("a", data) + file("b", data)) + file("d2", "")))
+        .add("table_attribute", table(file("a", "<ea id=\"0\"><name>x</name>" + data.substr(6))))
+        .add("table_signature",
+             table("<signature style=\"CMS\"><offset>20</offset><size>4</size></signature>"));
+}
+
+void makeSeals(const std::string& corpus) {
+    const std::string artefacts = VECTORS_DIRECTORY "/artefacts/Sample.app/Contents/";
+    const std::string entries =
+        "<key>a</key><data>AAAAAAAAAAAAAAAAAAAAAAAAAAA=</data><key>b</key><dict><key>symlink</key>"
+        "<string>a</string><key>optional</key><true/></dict><key>c/d</key><dict><key>cdhash</key><data>qqo=</"
+        "data>"
+        "<key>requirement</key><string>identifier \"x\" and (cdhash H\"00\" or !always)</string></dict>";
+    const std::string rules =
+        "<key>^.*</key><true/><key>^a/</key><dict><key>omit</key><true/><key>weight</key><real>20.5</real></"
+        "dict>"
+        "<key>(b|c)+$</key><integer>3</integer><key>^[^/]{1,9}\\.x$</key><false/>";
+    const auto list = [&](const std::string& version) {
+        return "<plist><dict><key>files" + version + "</key><dict>" + entries + "</dict><key>rules" +
+               version + "</key><dict>" + rules + "</dict></dict></plist>";
+    };
+    Seeds(corpus, "verify_seal")
+        .add("application", readFile(artefacts + "_CodeSignature/CodeResources"))
+        .add("framework",
+             readFile(artefacts + "Frameworks/Greeting.framework/Versions/A/_CodeSignature/CodeResources"))
+        .add("version_1", list(""))
+        .add("version_2", list("2"))
+        .add("requirement",
+             "designated => identifier com.example.a and (cdhash H\"ABab\" or !(anchor trusted and never))");
+}
+
 /// The first byte says which file of an artefact the rest is (fuzz/c_interface.cpp).
 void makeFilesOfArtefacts(const std::string& corpus) {
     const std::string artefacts = VECTORS_DIRECTORY "/artefacts/";
@@ -288,6 +378,7 @@ void makeFilesOfArtefacts(const std::string& corpus) {
     add("property_list", 5, readFile(artefacts + "Sample.app/Contents/Info.plist"));
     add("main_executable", 6, foundation::toString(ExecutableImageBuilder().build()));
     add("roots", 7, readFile(VECTORS_DIRECTORY "/platform/roots/sample.pem"));
+    add("record_name", 8, "\2\x90" + std::string(20, 'h'));
 }
 
 }  // namespace
@@ -303,7 +394,8 @@ int main(int argc, char** argv) {
         const std::string corpus = argv[1];
         for (const auto make :
              {makeTickets, makeCertificateBlocks, makeSuperblobs, makeCodeSignatures, makeMessages,
-              makeExecutables, makeArchives, makeDocuments, makeFilesOfArtefacts})
+              makeExecutables, makeArchives, makeDocuments, makeSignedExecutables, makeVerifiedDiskImages,
+              makeVerifiedPackages, makeSeals, makeFilesOfArtefacts})
             make(corpus);
         return 0;
     } catch (const std::exception& failure) {

@@ -18,7 +18,8 @@ struct FoundArtefacts {
 };
 
 /// All disk images, packages, bundles and executable images at or below `path`, in byte order of their paths.
-/// A bundle is one artefact: what is in it is not looked for. Symbolic links are not followed.
+/// A bundle is one artefact: what is in it is not looked for. `path` may be a symbolic link to a directory;
+/// links below it are not followed.
 FoundArtefacts findArtefacts(const std::string& path, const Platform& platform);
 
 }  // namespace pinwell::gate

@@ -7,6 +7,7 @@
 #include <string>
 #include <vector>
 
+#include "gate/find.h"
 #include "gate/run.h"
 #include "src/host_platform.h"
 #include "support/environment.h"
@@ -26,6 +27,11 @@ class GateTest : public testing::Test {
     /// The result of a run over one path, without the network; with `tickets`, as with --tickets.
     Result judge(const std::string& path, const gate::TicketDirectory* tickets = nullptr) const;
     int exitStatusFor(const std::string& path) const { return gate::exitStatusOf(judge(path).verdict); }
+
+    /// The artefacts of a tree.
+    gate::FoundArtefacts find(const std::string& path) const {
+        return gate::findArtefacts(path, host_.services());
+    }
 
     /// Staples a ticket that lists all code of the artefact. Fails the test if it cannot.
     void staple(const std::string& path) const;

@@ -1,4 +1,4 @@
-#include "signed_parts.h"
+#include "support/signed_image.h"
 
 #include <algorithm>
 

@@ -1,0 +1,45 @@
+// Deep verification of a disk image: trailer, signature, pages, and the block table as a second opinion.
+//
+// The first byte of the input says what the rest is:
+//
+//   0  an image as it is
+//   1  a block table, whose length comes first in two bytes, and the data that it speaks of: in Base64 in a
+//      property list, the fuzzer would not find its fields
+#include <algorithm>
+
+#include "foundation/byte_reader.h"
+#include "foundation/byte_writer.h"
+#include "support/tabled_image_builder.h"
+#include "verified_bytes.h"
+#include "verify/disk_image.h"
+
+namespace pinwell::fuzz {
+namespace {
+
+Data imageAround(ByteView input) {
+    foundation::ByteReader reader(input);
+    if (reader.remaining() < 2) return {};
+    const std::size_t length = std::min<std::size_t>(reader.be16("length"), reader.remaining());
+    const ByteView table = reader.bytes(length, "table");
+    const ByteView data = reader.bytes(reader.remaining(), "data");
+    return test::imageOfTable(table, data, {.data = test::crcOf(data)});
+}
+
+/// A stapled ticket has a signature of its own, at which nobody looks here.
+bool mayHoldTicket(ByteView image) {
+    const Data slot = foundation::ByteWriter().be32(0x10002).data();
+    return std::search(image.begin(), image.end(), slot.begin(), slot.end()) != image.end();
+}
+
+}  // namespace
+
+void examine(ByteView input) {
+    if (input.empty()) return;
+    const bool isTable = input.front() == std::byte{1};
+    const ByteView rest = input.subspan(1);
+    const Data image = isTable ? imageAround(rest) : foundation::toData(rest);
+    examineVerified(image, verify::verifyDiskImage,
+                    mayHoldTicket(image) ? Coverage::partial : Coverage::whole);
+}
+
+}  // namespace pinwell::fuzz
