@@ -1,16 +1,14 @@
 // pinwell-gate: whether software that was received may be let in.
 #include <sysexits.h>
-#include <unistd.h>
 
 #include <CLI/CLI.hpp>
 #include <chrono>
 #include <csignal>
-#include <cstdio>
-#include <cstdlib>
 #include <exception>
 #include <filesystem>
 #include <map>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -23,6 +21,7 @@
 #include "gate/find.h"
 #include "gate/policy.h"
 #include "gate/render.h"
+#include "gate/report_file.h"
 #include "gate/run.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
@@ -38,38 +37,6 @@ using namespace pinwell::gate;
 void complain(std::string_view text) {
     companion::complain("pinwell-gate", text);
 }
-
-/// A document that goes to a file, which is opened before any artefact is read, or to standard output.
-class Output {
-  public:
-    /// Empty: standard output.
-    explicit Output(std::string path) : path_(std::move(path)) {}
-
-    /// Makes the file, or empties it.
-    bool open() {
-        if (path_.empty()) return true;
-        file_.reset(std::fopen(path_.c_str(), "we"));
-        if (!file_) complain("cannot write to " + path_);
-        return file_ != nullptr;
-    }
-
-    bool write(const std::string& text) {
-        std::FILE* const target = path_.empty() ? stdout : file_.get();
-        const bool isWritten =
-            std::fwrite(text.data(), 1, text.size(), target) == text.size() && std::fflush(target) == 0;
-        if (!isWritten)
-            complain("cannot write to " + (path_.empty() ? std::string("standard output") : path_));
-        return isWritten;
-    }
-
-  private:
-    struct Close {
-        void operator()(std::FILE* file) const noexcept { static_cast<void>(std::fclose(file)); }
-    };
-
-    std::string path_;
-    std::unique_ptr<std::FILE, Close> file_;
-};
 
 /// Policy options of the command line, over those of a file.
 struct PolicyArguments {
@@ -194,15 +161,57 @@ std::vector<std::string> expanded(const Options& options, const Platform& platfo
     return all;
 }
 
+/// Opens the files that the run will write, and refuses those that it is to read.
+int openReports(const Options& options, ReportFile& report, ReportFile& attestation) {
+    // A report in a bundle would be found to be one file too many.
+    for (const std::string& path : {options.output, options.attestation}) {
+        if (path.empty() || options.isRecursive) continue;
+        if (const std::string* const bundle = directoryAround(path, options.paths)) {
+            complain(path + " is in " + *bundle + ", which is to be judged");
+            return EX_USAGE;
+        }
+    }
+    for (ReportFile* const file : {&report, &attestation}) {
+        if (const auto problem = file->open()) {
+            complain(*problem);
+            return EX_CANTCREAT;
+        }
+    }
+    if (report.isSameAs(attestation)) {
+        complain(options.output + " cannot hold both the report and the statement");
+        return EX_USAGE;
+    }
+    return EX_OK;
+}
+
+/// Whether a file to be written is one of the artefacts, which it would replace.
+bool isArtefact(const ReportFile& file, const std::vector<std::string>& paths) {
+    const std::string* const artefact = file.amongst(paths);
+    if (artefact != nullptr) complain("the report would replace " + *artefact + ", which is to be judged");
+    return artefact != nullptr;
+}
+
+int writeReports(const Options& options, const std::vector<Result>& results, ReportFile& report,
+                 ReportFile& attestation) {
+    std::optional<std::string> problem = report.write(render(options.format, results));
+    if (!problem && !options.attestation.empty()) {
+        const auto now = std::chrono::system_clock::now().time_since_epoch();
+        const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(now).count();
+        problem = attestation.write(renderAttestation(results, options, seconds));
+    }
+    if (!problem) return exitStatusOf(results);
+    complain(*problem);
+    return EX_IOERR;
+}
+
 int gate(const Options& options) {
     // What the tool's own functions would say is among the checks.
     verboseLevel = kVerbosityQuiet;
     const HostPlatform host([](int) {});
     const Platform platform = host.services();
-    Output report(options.output);
-    Output attestation(options.attestation);
-    if (!report.open()) return EX_CANTCREAT;
-    if (!options.attestation.empty() && !attestation.open()) return EX_CANTCREAT;
+    ReportFile report(options.output);
+    ReportFile attestation(options.attestation);
+    if (const int status = openReports(options, report, attestation); status != EX_OK) return status;
     confine(options, platform);
 
     std::unique_ptr<const TicketDirectory> tickets;
@@ -215,16 +224,11 @@ int gate(const Options& options) {
         }
     }
     std::vector<Result> problems;
-    std::vector<Result> results =
-        judgeAll(expanded(options, platform, problems), options, tickets.get(), platform);
+    const std::vector<std::string> paths = expanded(options, platform, problems);
+    if (isArtefact(report, paths) || isArtefact(attestation, paths)) return EX_USAGE;
+    std::vector<Result> results = judgeAll(paths, options, tickets.get(), platform);
     results.insert(results.end(), problems.begin(), problems.end());
-
-    if (!report.write(render(options.format, results))) return EX_IOERR;
-    const auto now = std::chrono::system_clock::now().time_since_epoch();
-    const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(now).count();
-    if (!options.attestation.empty() && !attestation.write(renderAttestation(results, options, seconds)))
-        return EX_IOERR;
-    return exitStatusOf(results);
+    return writeReports(options, results, report, attestation);
 }
 
 int run(int argc, char** argv) {

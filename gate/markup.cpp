@@ -1,8 +1,36 @@
 #include "gate/markup.h"
 
+#include <array>
+#include <utility>
+
 #include "foundation/description.h"
 
 namespace pinwell::gate {
+
+namespace {
+
+/// Marks, embeddings, overrides and isolates of the direction of writing (UAX #9).
+constexpr std::array<std::pair<std::string_view, std::string_view>, 12> kDirections{{
+    {"\xD8\x9C", "\\u061c"},
+    {"\xE2\x80\x8E", "\\u200e"},
+    {"\xE2\x80\x8F", "\\u200f"},
+    {"\xE2\x80\xAA", "\\u202a"},
+    {"\xE2\x80\xAB", "\\u202b"},
+    {"\xE2\x80\xAC", "\\u202c"},
+    {"\xE2\x80\xAD", "\\u202d"},
+    {"\xE2\x80\xAE", "\\u202e"},
+    {"\xE2\x81\xA6", "\\u2066"},
+    {"\xE2\x81\xA7", "\\u2067"},
+    {"\xE2\x81\xA8", "\\u2068"},
+    {"\xE2\x81\xA9", "\\u2069"},
+}};
+
+void replaceAll(std::string& text, std::string_view part, std::string_view other) {
+    for (std::size_t at = 0; (at = text.find(part, at)) != std::string::npos; at += other.size())
+        text.replace(at, part.size(), other);
+}
+
+}  // namespace
 
 std::string markupText(std::string_view text) {
     std::string result;
@@ -27,10 +55,11 @@ std::string markupText(std::string_view text) {
                 result += c;
         }
     }
+    // What turns the direction of writing makes one name look like another.
+    for (const auto& [mark, name] : kDirections) replaceAll(result, mark, name);
     // Two code points that XML has no place for, and that UTF-8 can say.
     for (const std::string_view none : {"\xEF\xBF\xBE", "\xEF\xBF\xBF"})
-        for (std::size_t at = 0; (at = result.find(none, at)) != std::string::npos;)
-            result.replace(at, none.size(), "\xEF\xBF\xBD");
+        replaceAll(result, none, "\xEF\xBF\xBD");
     return result;
 }
 

@@ -3,6 +3,7 @@
 
 #include "foundation/date.h"
 #include "foundation/format.h"
+#include "foundation/url.h"
 #include "gate/render.h"
 #include "gate/uri.h"
 
@@ -20,6 +21,11 @@ std::string timestampOf(std::int64_t time) {
     text.resize(kLength);
     text[kDateLength] = 'T';
     return text + "Z";
+}
+
+/// The field takes URIs alone, so that a path is made absolute with the working directory.
+std::string absoluteUriOf(const std::string& path) {
+    return uriOf(foundation::URL::fileURLWithPath(path).path());
 }
 
 /// What the artefact is known by: the digest of a file, and what a ticket lists.
@@ -67,7 +73,7 @@ std::string renderAttestation(const std::vector<Result>& results, const Options&
     OrderedJson levels = OrderedJson::array();
     if (isPassed) levels.push_back(options.isShallow ? "PINWELL_TICKET" : "PINWELL_DEEP");
     const std::string resource =
-        results.size() == 1 ? uriOf(results.front().path) : "urn:pinwell-gate:several";
+        results.size() == 1 ? absoluteUriOf(results.front().path) : "urn:pinwell-gate:several";
     const OrderedJson predicate{{"verifier", {{"id", "https://pinwell.example/gate"}}},
                                 {"timeVerified", timestampOf(time)},
                                 {"resourceUri", resource},

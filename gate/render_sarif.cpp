@@ -25,12 +25,24 @@ const char* levelOf(Outcome outcome) {
     return "note";
 }
 
+/// A text as itself in a message (SARIF 2.1.0, 3.11.5 and 3.11.6): names of files are neither placeholders
+/// nor links.
+std::string literal(const std::string& text) {
+    std::string escaped;
+    for (const char c : text) {
+        if (c == '{' || c == '}') escaped += c;
+        if (c == '[' || c == ']' || c == '\\') escaped += '\\';
+        escaped += c;
+    }
+    return escaped;
+}
+
 std::string messageOf(const Check& check) {
-    std::string text = check.place.empty() ? check.name : check.place;
+    std::string text = literal(check.place.empty() ? check.name : check.place);
     if (!check.expected.empty())
-        text += ": expected " + check.expected + ", found " + check.found;
+        text += ": expected " + literal(check.expected) + ", found " + literal(check.found);
     else
-        text += ": " + check.found;
+        text += ": " + literal(check.found);
     return text;
 }
 

@@ -57,12 +57,12 @@ constexpr std::array kNeededBySanitizers{"execve", "fork",        "vfork", "ptra
 
 // All that reading takes: files, memory, threads, time, and ending.
 constexpr std::array kReading{
-    // files; opening them has rules of its own
-    "close", "close_range", "read", "readv", "pread64", "preadv", "preadv2", "write", "writev", "lseek",
-    "_llseek", "fstat", "fstat64", "stat", "stat64", "lstat", "lstat64", "newfstatat", "fstatat64", "statx",
-    "statfs", "statfs64", "fstatfs", "fstatfs64", "access", "faccessat", "faccessat2", "getdents",
-    "getdents64", "readlink", "readlinkat", "getcwd", "fadvise64", "fadvise64_64", "readahead", "fcntl",
-    "fcntl64", "dup", "dup2", "dup3", "pipe2", "eventfd2", "poll", "ppoll", "ppoll_time64", "select",
+    // files; opening them has rules of its own, and so only reports that were opened before can be written
+    "close", "close_range", "read", "readv", "pread64", "preadv", "preadv2", "write", "writev", "ftruncate",
+    "ftruncate64", "lseek", "_llseek", "fstat", "fstat64", "stat", "stat64", "lstat", "lstat64", "newfstatat",
+    "fstatat64", "statx", "statfs", "statfs64", "fstatfs", "fstatfs64", "access", "faccessat", "faccessat2",
+    "getdents", "getdents64", "readlink", "readlinkat", "getcwd", "fadvise64", "fadvise64_64", "readahead",
+    "fcntl", "fcntl64", "dup", "dup2", "dup3", "pipe2", "eventfd2", "poll", "ppoll", "ppoll_time64", "select",
     "_newselect", "pselect6", "pselect6_time64", "umask",
     // memory
     "brk", "mmap", "mmap2", "map_shadow_stack", "mseal", "munmap", "mremap", "mprotect", "madvise", "mincore",

@@ -1,44 +1,21 @@
 // pinwell-gate as it is run: samples of a real record service, stapled by the real tool, each spoilt in one
 // way.
-#include <csignal>
 #include <filesystem>
 #include <functional>
 #include <ostream>
 
-#include "foundation/json.h"
-#include "foundation/value.h"
-#include "foundation/xml_parser.h"
-#include "local_service.h"
+#include "gate_fixture.h"
 #include "support/file_properties.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::Value;
-using testing::AllOf;
 using testing::HasSubstr;
 using testing::IsEmpty;
-using testing::Not;
 using testing::StartsWith;
 
-class Gate : public LocalServiceTest {
+class Gate : public GateRun {
   protected:
-    void SetUp() override {
-        record("issue", samples);
-        serveRecords();
-        for (const std::string& path : samples) ASSERT_EQ(pinwell({"staple", path}).exitStatus, 0) << path;
-    }
-
-    ProcessResult gate(std::vector<std::string> arguments) const {
-        Command made = command(std::move(arguments));
-        made.executable = PINWELL_GATE_PROGRAM;
-        return runProcess(made);
-    }
-    ProcessResult gate(std::vector<std::string> arguments, const std::vector<std::string>& paths) const {
-        arguments.insert(arguments.end(), paths.begin(), paths.end());
-        return gate(std::move(arguments));
-    }
-
     /// Samples that no ticket was stapled to.
     std::vector<std::string> freshSamples() const {
         const ProcessResult result = lumora({"sample", directory / "fresh"});
@@ -46,20 +23,10 @@ class Gate : public LocalServiceTest {
         return linesOf(result.output);
     }
 
-    void stopService() const {
-        serving->sendSignal(SIGTERM);
-        EXPECT_EQ(serving->wait().exitStatus, 0);
-    }
-
     std::string policyFile(std::string_view text) const {
         writeFile(directory / "policy.toml", text);
         return directory / "policy.toml";
     }
-
-    const std::string& application() const { return samples.at(0); }
-    const std::string& image() const { return samples.at(1); }
-    const std::string& unsignedImage() const { return samples.at(2); }
-    const std::string& package() const { return samples.at(3); }
 };
 
 // Untouched samples.
@@ -81,12 +48,6 @@ std::size_t placeOf(const std::string& contents, std::string_view text) {
 }
 
 using Spoil = std::function<void(const std::string& path)>;
-
-void flip(const std::string& path, std::size_t at) {
-    std::string contents = readFile(path);
-    contents.at(at) = static_cast<char>(contents.at(at) ^ 1);
-    writeFile(path, std::string_view(contents));
-}
 
 Spoil byteAt(std::size_t at) {
     return [=](const std::string& path) { flip(path, at); };
@@ -379,88 +340,7 @@ TEST_F(Gate, EndsWith65ForWhatThePolicyDoesNotAdmit) {
     EXPECT_EQ(gate({"--max-ticket-age", "1d", "--offline", application()}).exitStatus, 0);
 }
 
-// Reports.
-
-TEST_F(Gate, ReportsInJson) {
-    flip(application() + "/Contents/Resources/ReadMe.txt", 0);
-    const ProcessResult result = gate({"--format", "json", "--offline"}, {image(), application()});
-    EXPECT_EQ(result.exitStatus, 65);
-    const auto document = foundation::parseJSON(foundation::asBytes(result.output));
-    ASSERT_TRUE(document.has_value()) << result.output;
-    EXPECT_EQ((*document)["version"].unsignedIntegerValue(), 1U);
-    const auto* const results = (*document)["results"].array();
-    ASSERT_NE(results, nullptr);
-    ASSERT_EQ(results->size(), 2U);
-    const auto text = [](const Value& value) {
-        const std::string* const found = value.string();
-        return found == nullptr ? std::string("no text") : *found;
-    };
-    EXPECT_EQ(text(results->at(0)["path"]), image());
-    EXPECT_EQ(text(results->at(0)["verdict"]), "good");
-    EXPECT_EQ(results->at(0)["exitStatus"].unsignedIntegerValue(), 0U);
-    EXPECT_EQ(text(results->at(1)["path"]), application());
-    EXPECT_EQ(text(results->at(1)["verdict"]), "altered");
-    EXPECT_EQ(results->at(1)["exitStatus"].unsignedIntegerValue(), 65U);
-    bool isNamed = false;
-    for (const Value& one : *results) {
-        const auto* const checks = one["checks"].array();
-        ASSERT_NE(checks, nullptr);
-        EXPECT_FALSE(checks->empty());
-        for (const Value& check : *checks) {
-            EXPECT_NE(check["name"].string(), nullptr);
-            isNamed = isNamed || (text(check["name"]) == "sealed-file" &&
-                                  text(check["place"]) == "Contents/Resources/ReadMe.txt" &&
-                                  text(check["outcome"]) == "failed");
-        }
-    }
-    EXPECT_TRUE(isNamed) << result.output;
-}
-
-TEST_F(Gate, ReportsInTheFormsOfOthers) {
-    flip(application() + "/Contents/Resources/ReadMe.txt", 0);
-    const std::vector<std::pair<std::string, std::string>> forms{
-        {"sarif", "\"2.1.0\""}, {"junit", "<testsuites"}, {"html", "<html"}};
-    for (const auto& [form, part] : forms) {
-        const ProcessResult result = gate({"--format", form, "--offline"}, samples);
-        EXPECT_EQ(result.exitStatus, 65) << form;
-        EXPECT_THAT(result.output, AllOf(HasSubstr(part), HasSubstr("Contents/Resources/ReadMe.txt")))
-            << form;
-        EXPECT_THAT(result.errors, IsEmpty()) << form;
-    }
-}
-
-TEST_F(Gate, ReportsInJsonAsTheSchemaHasIt) {
-    flip(application() + "/Contents/Resources/ReadMe.txt", 0);
-    std::vector<std::string> paths = samples;
-    paths.push_back(directory / "missing");
-    writeFile(directory / "report.json",
-              std::string_view(gate({"--format", "json", "--offline"}, paths).output));
-    Command check;
-    check.executable = JSONSCHEMA_PROGRAM;
-    check.arguments = {"-i", directory / "report.json", GATE_SCHEMA};
-    const ProcessResult result = runProcess(check);
-    EXPECT_EQ(result.exitStatus, 0) << result.output << result.errors;
-}
-
-TEST_F(Gate, ReportsInXmlThatIsWellFormed) {
-    // A name that XML has no characters for.
-    const std::string odd = directory / "a<&\"'\x01\xFF.dmg";
-    std::filesystem::copy_file(image(), odd);
-    const ProcessResult result = gate({"--format", "junit", "--offline", odd, application()});
-    EXPECT_EQ(result.exitStatus, 0) << result.output;
-    struct Ignored : foundation::XMLEvents {
-        void begin(std::string_view, const foundation::XMLAttributes&) override { ++elements; }
-        void end(std::string_view) override {}
-        void text(std::string_view) override {}
-        int elements = 0;
-    } events;
-    foundation::XMLParser parser(events, foundation::XMLParser::DocumentType::refused);
-    EXPECT_NO_THROW({
-        parser.feed(foundation::asBytes(result.output));
-        parser.finish();
-    }) << result.output;
-    EXPECT_GT(events.elements, 10);
-}
+// Several paths.
 
 TEST_F(Gate, JudgesEveryArtefactOfADirectory) {
     const std::string below = directory / "samples";
@@ -471,30 +351,6 @@ TEST_F(Gate, JudgesEveryArtefactOfADirectory) {
     std::filesystem::create_directories(directory / "nothing");
     EXPECT_EQ(gate({"--offline", "-r", directory / "nothing"}).exitStatus, 66);
 }
-
-TEST_F(Gate, WritesTheReportToAFile) {
-    const std::string file = directory / "report.txt";
-    EXPECT_THAT(gate({"--offline", "-o", file, image()}), Ended(0, IsEmpty()));
-    EXPECT_EQ(readFile(file), gate({"--offline", image()}).output);
-    EXPECT_EQ(gate({"--offline", "-o", directory / "none/report", image()}).exitStatus, 73);
-}
-
-TEST_F(Gate, AttestsWhatItFound) {
-    const std::string file = directory / "statement.json";
-    const auto statement = [&](const std::string& path) {
-        gate({"--offline", "--attest", file, path});
-        const std::string text = readFile(file);
-        const auto document = foundation::parseJSON(foundation::asBytes(text));
-        EXPECT_TRUE(document.has_value()) << text;
-        EXPECT_THAT(text, HasSubstr("https://in-toto.io/Statement/v1"));
-        return text;
-    };
-    EXPECT_THAT(statement(image()), AllOf(HasSubstr("PASSED"), Not(HasSubstr("FAILED"))));
-    flip(image(), 0);
-    EXPECT_THAT(statement(image()), AllOf(HasSubstr("FAILED"), Not(HasSubstr("PASSED"))));
-}
-
-// Several paths.
 
 TEST_F(Gate, EndsWith66ForWhatIsNoArtefact) {
     writeFile(directory / "text", std::string_view("text\n"));
