@@ -447,9 +447,8 @@ INSTANTIATE_TEST_SUITE_P(
 
 TEST(CertificateSignature, IsNotTakenWithAByteBehindIt) {
     for (const SigningKey* key : {&kEc, &kRsa}) {
-        const Data der = selfSigned(*key)->der();
-        const ByteView signature = selfSigned(*key)->parts().signature;
-        Data longer = foundation::toData(signature);
+        const auto unchanged = selfSigned(*key);
+        Data longer = foundation::toData(unchanged->parts().signature);
         longer.push_back(std::byte{0});
         const auto changed = selfSigned(*key, [&](CertificateFields& fields) {
             fields.edit = [&](CertificateElements& all) { all.signature = bitString(longer); };
