@@ -33,6 +33,7 @@ constexpr std::size_t kFramingAllowance = 256 * 1024;
 // How long a closing connection is read on: closing at once would make the kernel reset it and take the
 // answer back that the peer has yet to read.
 constexpr milliseconds kFarewellTime{5'000};
+constexpr milliseconds kFarewellTimeWhenStopping{500};  // a service that is to end does not wait for idle clients
 constexpr std::size_t kFarewellBytes = 4 * 1024 * 1024;
 
 constexpr std::size_t kReadSize = 16 * 1024;
@@ -267,7 +268,7 @@ void Connection::close(bool unread) {
         socket().close(ignored);
         return;
     }
-    limitTime(kFarewellTime);
+    limitTime(context_.stopping ? kFarewellTimeWhenStopping : kFarewellTime);
     stream_->async_shutdown([self = shared_from_this()](ErrorCode) {
         ErrorCode ignored;
         if (!self->unread_) {
