@@ -14,11 +14,13 @@ function(pinwell_executable name)
   target_link_libraries(${name} PRIVATE pinwell_warnings pinwell_hardening pinwell_sanitizers)
 endfunction()
 
-# pinwell_test(NAME [WHOLE] [TIMEOUT SECONDS] SOURCES...): a GoogleTest program; every test in it is a ctest of its own,
-# or, with WHOLE, the program is one: for tables of many quick rows. PINWELL_WHOLE_TESTS makes all of a folder so.
+# pinwell_test(NAME [WHOLE] [SHARDS COUNT] [SLOW] [TIMEOUT SECONDS] SOURCES...): a GoogleTest program; every test in it is
+# a ctest of its own, or, with WHOLE, the program is one: for tables of many quick rows. PINWELL_WHOLE_TESTS makes all of
+# a folder so. SHARDS splits a whole program into that many, which run side by side.
+# SLOW gives its tests the label "slow": they are left out after an edit (scripts/test), and run for a release.
 function(pinwell_test name)
-  cmake_parse_arguments(PARSE_ARGV 1 test "WHOLE" "TIMEOUT" "")
-  if(PINWELL_WHOLE_TESTS)
+  cmake_parse_arguments(PARSE_ARGV 1 test "WHOLE;SLOW" "TIMEOUT;SHARDS" "")
+  if(PINWELL_WHOLE_TESTS OR test_SHARDS)
     set(test_WHOLE TRUE)
   endif()
   if(NOT test_TIMEOUT AND test_WHOLE)
@@ -26,16 +28,27 @@ function(pinwell_test name)
   elseif(NOT test_TIMEOUT)
     set(test_TIMEOUT 120)
   endif()
+  set(properties TIMEOUT ${test_TIMEOUT})
+  if(test_SLOW)
+    list(APPEND properties LABELS slow)
+  endif()
   add_executable(${name} ${test_UNPARSED_ARGUMENTS})
   set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/tests)
   target_compile_options(${name} PRIVATE ${pinwell_test_warnings})
   target_link_libraries(${name} PRIVATE pinwell_warnings pinwell_sanitizers test_support
                         GTest::gmock GTest::gtest_main)
-  if(test_WHOLE)
+  if(test_SHARDS)
+    foreach(shard RANGE 1 ${test_SHARDS})
+      math(EXPR index "${shard} - 1")
+      add_test(NAME ${name}.${shard} COMMAND ${name})
+      set_tests_properties(${name}.${shard} PROPERTIES ${properties}
+        ENVIRONMENT "GTEST_TOTAL_SHARDS=${test_SHARDS};GTEST_SHARD_INDEX=${index}")
+    endforeach()
+  elseif(test_WHOLE)
     add_test(NAME ${name} COMMAND ${name})
-    set_tests_properties(${name} PROPERTIES TIMEOUT ${test_TIMEOUT})
+    set_tests_properties(${name} PROPERTIES ${properties})
   else()
     # By the names of parameters: their values may be long, or hold bytes that differ from run to run.
-    gtest_discover_tests(${name} NO_PRETTY_VALUES DISCOVERY_MODE PRE_TEST PROPERTIES TIMEOUT ${test_TIMEOUT})
+    gtest_discover_tests(${name} NO_PRETTY_VALUES DISCOVERY_MODE PRE_TEST PROPERTIES ${properties})
   endif()
 endfunction()

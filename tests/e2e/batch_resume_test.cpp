@@ -30,7 +30,7 @@ class BatchResume : public BatchTest {
 
     std::vector<std::string> resuming(const std::vector<Artefact>& artefacts,
                                       const std::string& operation = "staple") const {
-        std::vector<std::string> arguments{operation, "--json", "--resume", journal};
+        std::vector<std::string> arguments{operation, "--json", "--retry-delay", "0", "--resume", journal};
         for (const Artefact& one : artefacts) arguments.push_back(one.path);
         return arguments;
     }

@@ -1,15 +1,29 @@
 #include "local_service.h"
 
+#include <filesystem>
 #include <stdexcept>
 #include <utility>
+
+#include "support/temporary_directory.h"
 
 namespace pinwell::test {
 
 LocalServiceTest::LocalServiceTest() {
-    const ProcessResult sample = lumora({"sample", directory / "samples"});
-    const ProcessResult init = lumora({"init", serviceDirectory, "--host", "127.0.0.1"});
-    if (sample.exitStatus != 0 || init.exitStatus != 0) throw std::runtime_error(sample.errors + init.errors);
-    samples = linesOf(sample.output);
+    // Keys take long to make. The tests of a process copy those of the first one.
+    static const TemporaryDirectory pattern;
+    static const std::vector<std::string> names = [this] {
+        const ProcessResult sample = lumora({"sample", pattern / "samples"});
+        const ProcessResult init = lumora({"init", pattern / "service", "--host", "127.0.0.1"});
+        if (sample.exitStatus != 0 || init.exitStatus != 0)
+            throw std::runtime_error(sample.errors + init.errors);
+        std::vector<std::string> made;
+        for (const std::string& path : linesOf(sample.output))
+            made.push_back(std::filesystem::path(path).filename());
+        return made;
+    }();
+    std::filesystem::copy(pattern.path(), directory.path(),
+                          std::filesystem::copy_options::recursive | std::filesystem::copy_options::copy_symlinks);
+    for (const std::string& name : names) samples.push_back(directory / "samples/" + name);
     environment["PINWELL_PLATFORM"] = serviceDirectory + "/platform";
 }
 
