@@ -62,9 +62,9 @@ PostgresCluster::PostgresCluster() {
 
 PostgresCluster::PostgresCluster(ReplicaOf origin) {
     makeFolders();
-    mustSucceed(asOwner("pg_basebackup",
-                        {"--pgdata", path(), "--username", "postgres", "--host", origin.primary.socketDirectory(),
-                         "--write-recovery-conf", "--no-sync", "--checkpoint", "fast"}),
+    mustSucceed(asOwner("pg_basebackup", {"--pgdata", path(), "--username", "postgres", "--host",
+                                          origin.primary.socketDirectory(), "--write-recovery-conf",
+                                          "--no-sync", "--checkpoint", "fast"}),
                 "pg_basebackup");
     start();
 }
