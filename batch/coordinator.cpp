@@ -336,9 +336,10 @@ void Coordinator::end(const ItemRef& item, const Outcome& outcome) {
     const bool wasCutShort = outcome.cause == Cause::timedOut || outcome.cause == Cause::interrupted;
     if (wasCutShort && item->lastError)
         report.messages.push_back(foundation::format("error is %@", item->lastError));
+    const std::string filesState = item->run->filesState();
     item->run.reset();
     item->answer = {};
-    events_.ended(report);
+    events_.ended(report, filesState);
 }
 
 void Coordinator::endUnbegun(const std::string& path, Cause cause) {
@@ -347,7 +348,7 @@ void Coordinator::endUnbegun(const std::string& path, Cause cause) {
     report.operation = nameOfOperation(settings_.operation);
     report.exitStatus = signal_ ? companion::kSignalBase + *signal_ : kExitNoHost;
     report.cause = cause;
-    events_.ended(report);
+    events_.ended(report, {});
 }
 
 }  // namespace pinwell::batch

@@ -36,7 +36,8 @@ class Coordinator {
         /// Whether the artefact at this path is to be worked on; false for another part's, and for one that
         /// was named before.
         std::function<bool(const std::string& path)> isWanted;
-        std::function<void(const Report& report)> ended;
+        /// `filesState` is as ArtefactRun has it; empty if the artefact was not begun.
+        std::function<void(const Report& report, const std::string& filesState)> ended;
         /// Whether an earlier run has done what was begun. On a worker's thread.
         std::function<bool(const std::string& path, const retrieval::ArtefactRun& run)> isDoneBefore;
         std::function<void()> wasDoneBefore;

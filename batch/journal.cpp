@@ -7,7 +7,6 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <charconv>
 #include <utility>
 
 #include "batch/report.h"
@@ -25,7 +24,8 @@ constexpr std::string_view kFirstLine = "pinwell-batch journal 1\n";
 constexpr std::string_view kUnknown = "-";
 constexpr std::size_t kJournalPieceSize = std::size_t{64} * 1024;
 constexpr std::size_t kLongestLine = std::size_t{32} * 1024;
-constexpr std::size_t kFields = 7;
+constexpr std::size_t kFields = 6;
+constexpr std::string_view kEnded = "ended ";
 
 std::string escaped(std::string_view path) {
     constexpr std::string_view kDigits = "0123456789ABCDEF";
@@ -43,26 +43,12 @@ std::string escaped(std::string_view path) {
     return text;
 }
 
-template <class Number>
-std::optional<Number> numberIn(std::string_view text) {
-    Number number{};
-    const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
-    if (error != std::errc{} || end != text.data() + text.size()) return std::nullopt;
-    return number;
+std::string orUnknown(const std::string& text) {
+    return text.empty() ? std::string(kUnknown) : text;
 }
 
-std::optional<FileState> stateIn(std::string_view size, std::string_view time) {
-    const std::size_t point = time.find('.');
-    if (point == std::string_view::npos) return std::nullopt;
-    const auto bytes = numberIn<std::uint64_t>(size);
-    const auto seconds = numberIn<std::int64_t>(time.substr(0, point));
-    const auto nanoseconds = numberIn<std::int64_t>(time.substr(point + 1));
-    if (!bytes || !seconds || !nanoseconds) return std::nullopt;
-    return FileState{*bytes, *seconds, *nanoseconds};
-}
-
-std::string keyOf(std::string_view operation, std::string_view escapedPath) {
-    return std::string(operation) + " " + std::string(escapedPath);
+std::string stateAndName(std::string_view state, std::string_view recordName) {
+    return std::string(state) + " " + std::string(recordName);
 }
 
 std::optional<std::array<std::string_view, kFields>> fieldsOf(std::string_view line) {
@@ -85,7 +71,9 @@ Result<Journal> Journal::open(const std::string& path) {
     if (!file) return Error::posix(errno, path);
     struct stat status {};
     if (::fstat(file.get(), &status) != 0) return Error::posix(errno, path);
-    if (!S_ISREG(status.st_mode)) return Error::posix(EINVAL, path);
+    if (!S_ISREG(status.st_mode))
+        return Error(foundation::kDataErrorDomain, foundation::kMalformedDocument,
+                     path + " is not a regular file.");
     Journal journal(path, std::move(file));
     if (const auto done = journal.read(); !done) return done.error();
     return journal;
@@ -125,35 +113,36 @@ Result<void> Journal::read() {
 }
 
 void Journal::readLine(std::string_view line) {
-    const auto fields = fieldsOf(line);
-    if (!fields) return;
-    const auto& [status, cause, operation, size, time, recordName, path] = *fields;
-    std::string key = keyOf(operation, path);
-    const auto state = stateIn(size, time);
-    if (status != "0" || cause != nameOf(Cause::worked) || !state || recordName == kUnknown) {
-        worked_.erase(key);
+    if (line.starts_with(kEnded)) {
+        const auto ended = worked_.find(line.substr(kEnded.size()));
+        if (ended != worked_.end()) ended->second.clear();
         return;
     }
-    worked_.insert_or_assign(std::move(key),
-                             JournalEntry{.state = state, .recordName = std::string(recordName)});
-}
-
-const JournalEntry* Journal::find(const std::string& canonicalPath, std::uint8_t operation) const {
-    const auto found = worked_.find(keyOf(nameOfOperation(operation), escaped(canonicalPath)));
-    return found == worked_.end() ? nullptr : &found->second;
-}
-
-Result<void> Journal::add(const std::string& canonicalPath, const JournalEntry& entry) {
-    std::string line = std::to_string(entry.exitStatus) + " " + std::string(nameOf(entry.cause)) + " " +
-                       std::string(nameOfOperation(entry.operation)) + " ";
-    if (entry.state)
-        line += std::to_string(entry.state->size) + " " + std::to_string(entry.state->seconds) + "." +
-                std::to_string(entry.state->nanoseconds);
+    const auto fields = fieldsOf(line);
+    if (!fields) return;
+    const auto& [status, cause, operation, state, recordName, path] = *fields;
+    const auto ofOperation = worked_.find(operation);
+    if (ofOperation == worked_.end()) return;
+    if (status != "0" || cause != nameOf(Cause::worked) || state == kUnknown || recordName == kUnknown)
+        ofOperation->second.erase(std::string(path));
     else
-        line += std::string(kUnknown) + " " + std::string(kUnknown);
-    line += " " + (entry.recordName.empty() ? std::string(kUnknown) : entry.recordName) + " " +
-            escaped(canonicalPath) + "\n";
-    return append(line);
+        ofOperation->second.insert_or_assign(std::string(path), stateAndName(state, recordName));
+}
+
+bool Journal::hasDone(const JournalItem& item) const {
+    const auto& ofOperation = worked_.find(nameOfOperation(item.operation))->second;
+    const auto found = ofOperation.find(escaped(item.path));
+    return found != ofOperation.end() && found->second == stateAndName(item.filesState, item.recordName);
+}
+
+Result<void> Journal::add(const JournalItem& item, int exitStatus, Cause cause) {
+    return append(std::to_string(exitStatus) + " " + std::string(nameOf(cause)) + " " +
+                  std::string(nameOfOperation(item.operation)) + " " + orUnknown(item.filesState) + " " +
+                  orUnknown(item.recordName) + " " + escaped(item.path) + "\n");
+}
+
+Result<void> Journal::end(std::uint8_t operation) {
+    return append(std::string(kEnded) + std::string(nameOfOperation(operation)) + "\n");
 }
 
 // In one write, so that the lines of two runs do not mix.

@@ -1,6 +1,5 @@
 // pinwell-batch: many artefacts in one process.
 #include <malloc.h>
-#include <sys/stat.h>
 #include <sysexits.h>
 #include <unistd.h>
 
@@ -37,15 +36,6 @@ void complain(const std::string& text) {
     companion::complain(kProgramName, text);
 }
 
-// The file that carries the ticket.
-std::optional<FileState> stateOfCarrier(const std::string& path, retrieval::Kind kind) {
-    const std::string carrier = kind == retrieval::Kind::bundle ? path + "/Contents/CodeResources" : path;
-    struct stat status {};
-    if (::lstat(carrier.c_str(), &status) != 0) return std::nullopt;
-    return FileState{static_cast<std::uint64_t>(status.st_size), status.st_mtim.tv_sec,
-                     status.st_mtim.tv_nsec};
-}
-
 class Run {
   public:
     Run(const Settings& settings, std::optional<Journal> journal, std::optional<JUnitReport> junit)
@@ -73,6 +63,7 @@ class Run {
             return EX_USAGE;
         }
         if (signal) summary_.exitStatus = companion::kSignalBase + *signal;
+        if (journal_ && !signal && !coordinator.listError()) endJournal();
         return finish();
     }
 
@@ -82,7 +73,8 @@ class Run {
   private:
     Coordinator::Events events() {
         return {.isWanted = [this](const std::string& path) { return isWanted(path); },
-                .ended = [this](const Report& report) { take(report); },
+                .ended = [this](const Report& report,
+                                const std::string& filesState) { take(report, filesState); },
                 .isDoneBefore = [this](const std::string& path,
                                        const retrieval::ArtefactRun& run) { return isDoneBefore(path, run); },
                 .wasDoneBefore = [this] { ++summary_.resumed; },
@@ -99,24 +91,27 @@ class Run {
         return choice == Selection::Choice::wanted;
     }
 
-    // By path, and by what the file is: rebuilt with the same length and time, it still has another hash.
     bool isDoneBefore(const std::string& path, const retrieval::ArtefactRun& run) const {
-        if (!journal_) return false;
-        const JournalEntry* const entry = journal_->find(canonicalPath(path), settings_.operation);
-        return entry != nullptr && entry->recordName == run.recordName() &&
-               stateOfCarrier(path, run.kind()) == entry->state;
+        return journal_ && journal_->hasDone({canonicalPath(path), settings_.operation, run.filesState(),
+                                              run.recordName()});
     }
 
-    void take(const Report& report) {
+    void take(const Report& report, const std::string& filesState) {
         summary_.count(report);
-        if (journal_ && report.attempts > 0) {
-            const auto state = stateOfCarrier(report.path, report.kind);
-            keep(journal_->add(canonicalPath(report.path), {report.exitStatus, report.cause,
-                                                            settings_.operation, state, report.recordName}));
-        }
+        if (journal_ && report.attempts > 0)
+            keep(journal_->add(
+                {canonicalPath(report.path), settings_.operation, filesState, report.recordName},
+                report.exitStatus, report.cause));
         if (junit_) junit_->add(report);
         if (settings_.asJson) return print(asJson(report));
         if (!settings_.isQuiet) print(asText(report, settings_.isVerbose, inColor_));
+    }
+
+    // A ticket may be revoked any time: a validation that has come to its end does not count for the next
+    // one. What nobody got to look at is still to be done, though, and a staple is done once for all.
+    void endJournal() {
+        if (settings_.operation == kOperationValidate && summary_.holdsVerdictsOnly())
+            keep(journal_->end(settings_.operation));
     }
 
     void print(const std::string& line) {

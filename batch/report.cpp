@@ -1,5 +1,6 @@
 #include "batch/report.h"
 
+#include <algorithm>
 #include <nlohmann/json.hpp>
 
 #include "foundation/format.h"
@@ -14,6 +15,12 @@ void Summary::count(const Report& report) {
     ++total;
     ++byCause.at(static_cast<std::size_t>(report.cause));
     exitStatus = retrieval::worseStatus(exitStatus, report.exitStatus);
+}
+
+bool Summary::holdsVerdictsOnly() const {
+    const auto causes = retrieval::allCauses();
+    return std::all_of(causes.begin(), causes.end(),
+                       [this](Cause cause) { return isVerdict(cause) || numberOf(cause) == 0; });
 }
 
 std::string_view nameOfOperation(std::uint8_t operation) noexcept {

@@ -25,6 +25,9 @@ struct Summary {
     std::uint64_t numberOf(retrieval::Cause cause) const {
         return byCause.at(static_cast<std::size_t>(cause));
     }
+
+    /// Every report says something of its artefact.
+    bool holdsVerdictsOnly() const;
 };
 
 /// "staple" or "validate".

@@ -5,6 +5,7 @@
 
 #include "foundation/process.h"
 #include "foundation/url.h"
+#include "retrieval/file_state.h"
 #include "src/DownloadDelegate.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
@@ -131,6 +132,7 @@ struct ArtefactRun::Reading {
     // Of a bundle, whose hashed file does not note it.
     std::optional<URL> executable;
     std::optional<files::ItemState> executableState;
+    std::string executableText;  // its state, as a text
 };
 
 std::string_view nameOf(Kind kind) noexcept {
@@ -183,6 +185,7 @@ std::optional<Outcome> ArtefactRun::guarded(Outcome ifThrown,
 std::optional<Outcome> ArtefactRun::open(const PWHashedFile::BeforeReading& beforeReading) {
     messages_.clear();
     recordName_.clear();
+    filesState_.clear();
     kind_ = Kind::none;
     if (!isPath(path_)) {
         messages_.push_back(foundation::format("%@ is no path: it holds a zero byte.", path_));
@@ -191,16 +194,21 @@ std::optional<Outcome> ArtefactRun::open(const PWHashedFile::BeforeReading& befo
     reading_ = std::make_unique<Reading>(platform_);
     Reading& reading = *reading_;
     const URL url = URL::fileURLWithPath(path_);
+    const std::string stateBeforeReading = stateOfFile(url.path());
 
     reading.file = PWHashedFile::initWithFileURL(url, reading.platform, beforeReading);
     if (reading.file == nullptr) return Outcome{kExitNoInput, Cause::unsupported};
     kind_ = kindOf(*reading.file);
     if (const int status = reading.file->appropriateExitCode(); status != kExitOK)
         return Outcome{status, status == kExitCannotCreate ? Cause::notWritable : Cause::notReadable};
+    filesState_ = stateBeforeReading;
     if (kind_ == Kind::bundle) {
         reading.executable = platform_.files.mainExecutableOfBundle(url);
-        if (reading.executable)
+        if (reading.executable) {
             reading.executableState = platform_.files.stateOfItem(*reading.executable).asOptional();
+            reading.executableText = stateOfFile(reading.executable->path());
+        }
+        filesState_ = stateOfFiles();
     }
     if (const auto hash = reading.file->cdHash())
         recordName_ = recordNameForHash(reading.file->digestAlgorithm(), *hash);
@@ -313,7 +321,22 @@ std::optional<Outcome> ArtefactRun::finish(const Answer& answer) {
     } catch (const RunEnded& ended) {
         status = ended.status;
     }
-    return Outcome{status, causeOf(status, answer, *controller.hashedFile())};
+    const PWHashedFile& file = *controller.hashedFile();
+    if (operation_ == kOperationStaple && status == kExitOK) {
+        // What was read back is what is left, unless it has changed since.
+        filesState_ = stateOfFiles();
+        if (!file.isAsRead()) filesState_.clear();
+    }
+    return Outcome{status, causeOf(status, answer, file)};
+}
+
+// As it is now; of a bundle's executable, as it was before it was read.
+std::string ArtefactRun::stateOfFiles() const {
+    const std::string path = URL::fileURLWithPath(path_).path();
+    if (kind_ != Kind::bundle) return stateOfFile(path);
+    const std::string carrier = stateOfFile(path + "/Contents/CodeResources");
+    const std::string& executable = reading_->executableText;
+    return carrier.empty() || executable.empty() ? "" : carrier + "+" + executable;
 }
 
 }  // namespace pinwell::retrieval

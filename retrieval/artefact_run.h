@@ -71,6 +71,11 @@ class ArtefactRun {
     const std::string& recordName() const noexcept { return recordName_; }
     Kind kind() const noexcept { return kind_; }
 
+    /// What tells the files that the outcome is of, the artefact's executable and the one that carries the
+    /// ticket, from what is there later: a text without blanks (file_state.h). As they were before they were
+    /// read, and of a staple that worked as they were left. Empty if it is not known.
+    const std::string& filesState() const noexcept { return filesState_; }
+
     /// What `pinwell` would have printed, line by line.
     const std::vector<std::string>& messages() const noexcept { return messages_; }
 
@@ -87,11 +92,13 @@ class ArtefactRun {
     Outcome attachUnderLock(
         const std::function<foundation::Result<foundation::Data>(const std::string& recordName)>& ticketFor);
     bool isAsRead() const;
+    std::string stateOfFiles() const;
 
     const std::string path_;
     const std::uint8_t operation_;
     const Platform platform_;
     std::string recordName_;
+    std::string filesState_;
     Kind kind_ = Kind::none;
     std::vector<std::string> messages_;
     std::unique_ptr<Reading> reading_;

@@ -60,6 +60,11 @@ bool isCurable(Cause cause) noexcept {
     return cause == Cause::unreachable;
 }
 
+bool isVerdict(Cause cause) noexcept {
+    return cause != Cause::unreachable && cause != Cause::untrusted && cause != Cause::timedOut &&
+           cause != Cause::interrupted;
+}
+
 int worseStatus(int first, int second) noexcept {
     return weightOf(second) > weightOf(first) ? second : first;
 }

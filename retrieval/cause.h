@@ -34,6 +34,9 @@ std::string_view nameOf(Cause cause) noexcept;
 /// Whether another try may end better.
 bool isCurable(Cause cause) noexcept;
 
+/// Whether it says something of the artefact, or of the record; false if nobody got to look.
+bool isVerdict(Cause cause) noexcept;
+
 /// Of two exit statuses the one that counts for both: in the order 77, 73, 65, 66, 68, 0. Any other status
 /// counts more than 0 and less than 68.
 int worseStatus(int first, int second) noexcept;

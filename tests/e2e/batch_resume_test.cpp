@@ -4,12 +4,14 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <csignal>
 #include <filesystem>
 #include <set>
 
 #include "batch_fixture.h"
 #include "foundation/file_io.h"
+#include "support/volume.h"
 
 namespace pinwell::test {
 namespace {
@@ -45,11 +47,41 @@ class BatchResume : public BatchTest {
             for (std::string& name : namesIn(requests[seen_])) names.push_back(std::move(name));
         return names;
     }
+    /// Answers lookups of that record, and no other ones.
+    void serveOnly(const std::string& name) {
+        service().setHandler([this, name](const RecordedRequest& request) {
+            return namesIn(request) == std::vector{name} ? answer(bodyFor({name}))
+                   : namesIn(request).size() == 1        ? Response{.status = 503}
+                                                         : answer(R"({"records":[]})");
+        });
+    }
+    /// No file of this run grows beyond 4 KiB. Tickets are smaller.
+    Command withShortFiles(const std::vector<std::string>& arguments) const {
+        Command limited = batchCommand({"-c", "ulimit -f 4; exec \"$0\" \"$@\"", PINWELL_BATCH_PROGRAM});
+        limited.executable = "/bin/bash";
+        limited.arguments.insert(limited.arguments.end(), arguments.begin(), arguments.end());
+        return limited;
+    }
+    /// Until there is no room left on its volume.
+    static void fill(const std::string& path) {
+        const foundation::FileDescriptor file(::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600));
+        const std::string block(4096, 'b');
+        while (::write(file.get(), block.data(), block.size()) > 0) continue;
+        ASSERT_EQ(errno, ENOSPC);
+    }
     static std::string wholeLinesOf(const std::string& output) {
         return output.substr(0, output.rfind('\n') + 1);
     }
     std::uint64_t resumedOf(const ProcessResult& result) const {
         return summaryOf(result)["resumed"].unsignedIntegerValue();
+    }
+    /// Another byte in a file whose length and time of modification stay as they are.
+    static void changeUnseen(const std::string& path, std::size_t offset) {
+        const auto time = std::filesystem::last_write_time(path);
+        std::string contents = readFile(path);
+        contents.at(offset) = static_cast<char>(contents.at(offset) ^ 1);
+        writeFile(path, contents);
+        std::filesystem::last_write_time(path, time);
     }
     /// Bundles, whose ticket is a file of its own: it is there as a whole or not at all, whenever the process
     /// dies.
@@ -128,6 +160,27 @@ TEST_F(BatchResume, WhatWasRebuiltWithTheSameLengthAndTimeIsDoneAgain) {
     EXPECT_THAT(askedFor(), ElementsAre(recordNameOf(other)));
 }
 
+// The hash that a signature states is not one of all that the artefact holds.
+TEST_F(BatchResume, WhatWasChangedWithTheSameLengthTimeAndStatedHashIsDoneAgain) {
+    std::vector<Artefact> artefacts;
+    for (const Artefact& one : {signedImage(), signedPackage(), signedBundle()}) {
+        artefacts.push_back(writeArtefact(one, directory / ("builds/" + one.name)));
+        records[recordNameOf(artefacts.back())] = ticketOf(artefacts.back());
+    }
+    serveRecords();
+    for (const char* operation : {"staple", "validate"})
+        ASSERT_EQ(resume(artefacts, operation).exitStatus, 0);
+    ASSERT_EQ(resumedOf(resume(artefacts)), 3U);
+    const std::string uuid(16, '\x11');  // of the bundle's executable
+    changeUnseen(artefacts[0].path, 100);
+    changeUnseen(artefacts[1].path, artefacts[1].contents.size() - 1);
+    const std::string executable = artefacts[2].path + "/Contents/Programs/Sample";
+    changeUnseen(executable, readFile(executable).find(uuid));
+    askedFor();
+    EXPECT_EQ(resumedOf(resume(artefacts)), 0U);
+    EXPECT_THAT(askedFor(), SizeIs(3));
+}
+
 TEST_F(BatchResume, ABundleWhoseTicketIsGoneIsDoneAgain) {
     const auto bundles = writeBundles(2);
     serveRecords();
@@ -149,14 +202,58 @@ TEST_F(BatchResume, WhatFailedIsDoneAgain) {
     EXPECT_EQ(resumedOf(resume(images)), 4U);
 }
 
-TEST_F(BatchResume, WhatWasRevokedMeanwhileIsNotNoticed) {
-    // A journal says what was done, not what is so: that is for validate.
+// A staple says what was done, not what is so: that is for validate.
+TEST_F(BatchResume, AStapleThatIsDoneStaysDoneWhenItsTicketIsRevoked) {
     const auto images = writeImages(1);
     serveRecords();
     ASSERT_EQ(resume(images).exitStatus, 0);
     records[recordNameOf(images[0])] = sealed(images[0].payload().revoked());
-    EXPECT_EQ(resume(images).exitStatus, 0);
+    EXPECT_EQ(resumedOf(resume(images)), 1U);
     EXPECT_EQ(batch({"validate", "-q"}, images).exitStatus, 77);
+}
+
+TEST_F(BatchResume, AValidationThatHasEndedDoesNotHideARevocation) {
+    const auto images = writeImages(2);
+    serveRecords();
+    ASSERT_EQ(batch({"staple", "-q"}, images).exitStatus, 0);
+    ASSERT_EQ(resume(images, "validate").exitStatus, 0);
+    records[recordNameOf(images[0])] = sealed(images[0].payload().revoked());
+    const ProcessResult again = resume(images, "validate");
+    EXPECT_EQ(again.exitStatus, 77);
+    EXPECT_EQ(resumedOf(again), 0U);
+    EXPECT_THAT(reportsOf(again),
+                testing::UnorderedElementsAre(Reports("revoked", 77), Reports("worked", 0)));
+}
+
+// Else one that always fails would let the others rest on what was so once.
+TEST_F(BatchResume, AValidationHasEndedWhateverItSaysOfTheArtefacts) {
+    const auto images = writeImages(2);
+    serveRecords();
+    ASSERT_EQ(batch({"staple", "-q"}, {images[0]}).exitStatus, 0);
+    ASSERT_EQ(resume(images, "validate").exitStatus, 65);
+    records[recordNameOf(images[0])] = sealed(images[0].payload().revoked());
+    EXPECT_EQ(resume(images, "validate").exitStatus, 77);
+}
+
+TEST_F(BatchResume, AValidationGoesOnWhileSomeWereNotLookedAt) {
+    const auto images = writeImages(4);
+    serveRecords();
+    ASSERT_EQ(batch({"staple", "-q"}, images).exitStatus, 0);
+    askedFor();
+    // A part of the list, then one that nobody answers, then one that is given no time.
+    serveOnly(recordNameOf(images[0]));
+    const std::vector<std::string> impatient{"validate", "--json", "--retries", "0", "--resume", journal};
+    EXPECT_EQ(batch(impatient, images).exitStatus, 68);
+    serveNoMore();
+    EXPECT_EQ(resumedOf(batch(impatient, images)), 1U);
+    std::vector<std::string> late = impatient;
+    late.insert(late.end(), {"--deadline", "0"});
+    EXPECT_EQ(batch(late, images).exitStatus, 68);
+    serveRecords();
+    const ProcessResult last = resume(images, "validate");
+    EXPECT_EQ(last.exitStatus, 0);
+    EXPECT_EQ(resumedOf(last), 1U);
+    EXPECT_EQ(resumedOf(resume(images, "validate")), 0U) << "that one had ended";
 }
 
 TEST_F(BatchResume, AStapleIsNoValidation) {
@@ -165,7 +262,6 @@ TEST_F(BatchResume, AStapleIsNoValidation) {
     ASSERT_EQ(resume(images).exitStatus, 0);
     const ProcessResult validated = resume(images, "validate");
     EXPECT_THAT(reportsOf(validated), AllOf(SizeIs(2), Each(Reports("worked", 0))));
-    EXPECT_EQ(resumedOf(resume(images, "validate")), 2U);
     EXPECT_EQ(resumedOf(resume(images)), 2U);
 }
 
@@ -244,20 +340,59 @@ TEST_F(BatchResume, AJournalThatCannotBeWrittenIsSaidOnce) {
     const auto images = writeImages(60);
     serveRecords();
     ASSERT_EQ(batch({"staple", "-q"}, images).exitStatus, 0);
-    // No file may grow beyond 4 KiB. Tickets are smaller.
-    Command limited = batchCommand({});
-    limited.executable = "/bin/bash";
-    limited.arguments = {"-c", "ulimit -f 4; exec \"$0\" \"$@\"", PINWELL_BATCH_PROGRAM};
-    for (const std::string& argument : resuming(images, "validate")) limited.arguments.push_back(argument);
-    const ProcessResult result = runProcess(limited);
+    const ProcessResult result = runProcess(withShortFiles(resuming(images, "validate")));
     EXPECT_EQ(result.exitStatus, 74) << result.errors;
     EXPECT_THAT(linesOf(result.errors), ElementsAre(HasSubstr(journal)));
     EXPECT_THAT(reportsOf(result), AllOf(SizeIs(60), Each(Reports("worked", 0))));
     // What fitted counts, and what did not is done again.
     const ProcessResult again = resume(images, "validate");
     EXPECT_EQ(again.exitStatus, 0);
+    EXPECT_THAT(resumedOf(again), AllOf(testing::Ge(1U), testing::Lt(60U)));
     EXPECT_EQ(resumedOf(again) + reportsOf(again).size(), 60U);
-    EXPECT_EQ(resumedOf(resume(images, "validate")), 60U);
+}
+
+TEST_F(BatchResume, AFullVolumeUnderTheJournalCostsTheJournalAndNothingElse) {
+    const Volume volume("tmpfs");
+    if (volume.missing()) GTEST_SKIP() << *volume.missing();
+    const auto images = writeImages(60);
+    serveRecords();
+    journal = volume / "staple.journal";
+    const std::string ballast = volume / "ballast";
+    writeFile(journal, "");
+    fill(ballast);
+    // Not even its first line fits.
+    const ProcessResult none = resume(images);
+    EXPECT_EQ(none.exitStatus, 73);
+    EXPECT_THAT(
+        linesOf(none.errors),
+        ElementsAre(AllOf(StartsWith("pinwell-batch: the journal cannot be used: "), HasSubstr(journal))));
+    EXPECT_EQ(countStapled(images), 0U);
+
+    std::filesystem::remove(ballast);
+    writeFile(journal, "pinwell-batch journal 1\n");  // has a page to grow in
+    fill(ballast);
+    const ProcessResult some = resume(images);
+    EXPECT_EQ(some.exitStatus, 74);
+    EXPECT_THAT(linesOf(some.errors), ElementsAre(AllOf(HasSubstr(journal), HasSubstr("No space left"))));
+    EXPECT_THAT(reportsOf(some), AllOf(SizeIs(60), Each(Reports("worked", 0))));
+    EXPECT_EQ(countStapled(images), 60U);
+
+    std::filesystem::remove(ballast);
+    askedFor();
+    const ProcessResult rest = resume(images);
+    EXPECT_EQ(rest.exitStatus, 0) << rest.errors;
+    EXPECT_THAT(resumedOf(rest), AllOf(testing::Ge(1U), testing::Lt(60U)));
+    EXPECT_THAT(askedFor(), SizeIs(60U - resumedOf(rest)));
+    EXPECT_EQ(resumedOf(resume(images)), 60U);
+}
+
+TEST_F(BatchResume, AnArtefactThatFailsWeighsMoreThanAJournalThatDoes) {
+    const auto images = writeImages(60);
+    records[recordNameOf(images[0])] = std::nullopt;
+    serveRecords();
+    const ProcessResult result = runProcess(withShortFiles(resuming(images)));
+    EXPECT_EQ(result.exitStatus, 65);
+    EXPECT_THAT(result.errors, HasSubstr(journal));
 }
 
 // Runs that are killed.

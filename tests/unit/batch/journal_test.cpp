@@ -10,20 +10,25 @@
 namespace pinwell::test {
 namespace {
 
-using batch::FileState;
 using batch::Journal;
-using batch::JournalEntry;
+using batch::JournalItem;
 using retrieval::Cause;
 
 const std::string kFirst = "pinwell-batch journal 1\n";
-const FileState kState{10, 20, 30};
+const std::string kState = "10,20.30,40.50,60";
 
-JournalEntry worked(const FileState& state = kState) {
-    return {.exitStatus = 0,
-            .cause = Cause::worked,
-            .operation = kOperationStaple,
-            .state = state,
-            .recordName = "2/2/ab"};
+JournalItem staple(const std::string& path, const std::string& state = kState) {
+    return {.path = path, .operation = kOperationStaple, .filesState = state, .recordName = "2/2/ab"};
+}
+
+JournalItem validation(const std::string& path) {
+    JournalItem item = staple(path);
+    item.operation = kOperationValidate;
+    return item;
+}
+
+foundation::Result<void> addWorked(Journal&& journal, const JournalItem& item) {
+    return journal.add(item, 0, Cause::worked);
 }
 
 class Journals : public testing::Test {
@@ -37,45 +42,61 @@ class Journals : public testing::Test {
         writeFile(file, contents);
         return Journal::open(file).asOptional().has_value();
     }
-    std::optional<FileState> stateOf(const std::string& path) const {
-        const Journal journal = opened();
-        const JournalEntry* const entry = journal.find(path, kOperationStaple);
-        return entry == nullptr ? std::nullopt : entry->state;
-    }
+    /// Whether a run that begins now would leave it out.
+    bool hasDone(const JournalItem& item) const { return opened().hasDone(item); }
     TemporaryDirectory directory;
     const std::string file = directory / "journal";
 };
 
 TEST_F(Journals, KeepWhatWorked) {
-    ASSERT_TRUE(opened().add("/a b%\n.dmg", worked()));
-    EXPECT_EQ(readFile(file), kFirst + "0 worked staple 10 20.30 2/2/ab /a%20b%25%0A.dmg\n");
-    EXPECT_EQ(stateOf("/a b%\n.dmg"), kState);
-    EXPECT_EQ(stateOf("/a"), std::nullopt);
-    EXPECT_EQ(opened().find("/a b%\n.dmg", kOperationValidate), nullptr);
+    ASSERT_TRUE(addWorked(opened(), staple("/a b%\n.dmg")));
+    EXPECT_EQ(readFile(file), kFirst + "0 worked staple 10,20.30,40.50,60 2/2/ab /a%20b%25%0A.dmg\n");
+    EXPECT_TRUE(hasDone(staple("/a b%\n.dmg")));
+    EXPECT_FALSE(hasDone(staple("/a")));
+    EXPECT_FALSE(hasDone(validation("/a b%\n.dmg")));
+}
+
+TEST_F(Journals, TellWhatIsAtAPathFromWhatWasThere) {
+    ASSERT_TRUE(addWorked(opened(), staple("/a")));
+    for (const char* state : {"11,20.30,40.50,60", "10,20.31,40.50,60", "10,20.30,40.51,60",
+                              "10,20.30,40.50,61", "", "-", "10,20.30,40.50,60+1,2.3,4.5,6"})
+        EXPECT_FALSE(hasDone(staple("/a", state))) << state;
+    JournalItem other = staple("/a");
+    other.recordName = "2/2/ac";
+    EXPECT_FALSE(hasDone(other));
 }
 
 TEST_F(Journals, ForgetWhatFailedLater) {
     Journal journal = opened();
-    ASSERT_TRUE(journal.add("/a", worked()));
-    JournalEntry failed = worked();
-    failed.exitStatus = 65;
-    failed.cause = Cause::notIssued;
-    ASSERT_TRUE(journal.add("/a", failed));
-    EXPECT_EQ(stateOf("/a"), std::nullopt);
-    ASSERT_TRUE(journal.add("/a", worked({11, 20, 30})));
-    EXPECT_EQ(stateOf("/a"), (FileState{11, 20, 30}));
+    ASSERT_TRUE(journal.add(staple("/a"), 0, Cause::worked));
+    ASSERT_TRUE(journal.add(staple("/a"), 65, Cause::notIssued));
+    EXPECT_FALSE(hasDone(staple("/a")));
+    ASSERT_TRUE(journal.add(staple("/a", "other"), 0, Cause::worked));
+    EXPECT_TRUE(hasDone(staple("/a", "other")));
+    EXPECT_FALSE(hasDone(staple("/a")));
 }
 
 TEST_F(Journals, TakeWhatIsNotKnownForNotDone) {
     Journal journal = opened();
-    JournalEntry entry = worked();
-    entry.state = std::nullopt;
-    ASSERT_TRUE(journal.add("/a", entry));
-    entry = worked();
-    entry.recordName.clear();
-    ASSERT_TRUE(journal.add("/b", entry));
-    EXPECT_EQ(stateOf("/a"), std::nullopt);
-    EXPECT_EQ(stateOf("/b"), std::nullopt);
+    ASSERT_TRUE(journal.add(staple("/a", ""), 0, Cause::worked));
+    JournalItem nameless = staple("/b");
+    nameless.recordName.clear();
+    ASSERT_TRUE(journal.add(nameless, 0, Cause::worked));
+    EXPECT_FALSE(hasDone(staple("/a", "")));
+    EXPECT_FALSE(hasDone(staple("/a", "-")));
+    EXPECT_FALSE(hasDone(nameless));
+}
+
+TEST_F(Journals, BeginAnewAfterTheEndOfARun) {
+    Journal journal = opened();
+    ASSERT_TRUE(journal.add(validation("/a"), 0, Cause::worked));
+    ASSERT_TRUE(journal.add(staple("/a"), 0, Cause::worked));
+    ASSERT_TRUE(journal.end(kOperationValidate));
+    EXPECT_THAT(readFile(file), testing::EndsWith("\nended validate\n"));
+    EXPECT_FALSE(hasDone(validation("/a")));
+    EXPECT_TRUE(hasDone(staple("/a"))) << "another operation's";
+    ASSERT_TRUE(journal.add(validation("/a"), 0, Cause::worked));
+    EXPECT_TRUE(hasDone(validation("/a")));
 }
 
 TEST_F(Journals, BeginWithTheirFirstLine) {
@@ -91,28 +112,28 @@ TEST_F(Journals, BeginWithTheirFirstLine) {
 }
 
 TEST_F(Journals, PassOverLinesThatAreMalformed) {
-    const std::string good = "0 worked staple 10 20.30 2/2/ab /good\n";
+    const std::string good = "0 worked staple 10,20.30,40.50,60 2/2/ab /good\n";
     for (const std::string& line :
-         {std::string(""), std::string(" "), std::string("0 worked staple 10 20.30 2/2/ab"),
-          std::string("0 worked staple 10 20.30 2/2/ab /bad more"),
-          std::string("0 worked staple -1 20.30 2/2/ab /bad"),
-          std::string("0 worked staple 10 20 2/2/ab /bad"),
-          std::string("0 worked staple 10 20.x 2/2/ab /bad"),
-          std::string("0  worked staple 10 20.30 2/2/ab /bad"),
-          std::string("9 worked staple 10 20.30 2/2/ab /bad"),
-          std::string("0 revoked staple 10 20.30 2/2/ab /bad"),
-          std::string("0 worked staple 99999999999999999999 20.30 2/2/ab /bad"),
-          "0 worked staple 10 20.30 2/2/ab /" + std::string(100'000, 'x')}) {
-        ASSERT_TRUE(opensWith(kFirst + line + "\n" + good)) << line.substr(0, 60);
-        EXPECT_EQ(stateOf("/bad"), std::nullopt) << line.substr(0, 60);
-        EXPECT_EQ(stateOf("/good"), kState) << line.substr(0, 60);
+         {std::string(""), std::string(" "), std::string("ended"), std::string("ended staples"),
+          std::string("ended staple "), std::string(" ended staple"),
+          std::string("0 worked staple 10,20.30,40.50,60 2/2/ab"),
+          std::string("0 worked staple 10,20.30,40.50,60 2/2/ab /bad more"),
+          std::string("0 worked stapel 10,20.30,40.50,60 2/2/ab /bad"),
+          std::string("0 worked staple 10 20.30 2/2/ab /bad"), std::string("0 worked staple  2/2/ab /bad"),
+          std::string("0  worked staple 10,20.30,40.50,60 2/2/ab /bad"),
+          std::string("9 worked staple 10,20.30,40.50,60 2/2/ab /bad"),
+          std::string("0 revoked staple 10,20.30,40.50,60 2/2/ab /bad"),
+          "0 worked staple 10,20.30,40.50,60 2/2/ab /" + std::string(100'000, 'x')}) {
+        ASSERT_TRUE(opensWith(kFirst + good + line + "\n")) << line.substr(0, 60);
+        EXPECT_FALSE(hasDone(staple("/bad"))) << line.substr(0, 60);
+        EXPECT_TRUE(hasDone(staple("/good"))) << line.substr(0, 60);
     }
 }
 
 TEST_F(Journals, EndALineThatWasCutShortBeforeTheyGoOn) {
-    writeFile(file, kFirst + "0 worked staple 10 20.30 2/2/a");
-    ASSERT_TRUE(opened().add("/a", worked()));
-    EXPECT_EQ(stateOf("/a"), kState);
+    writeFile(file, kFirst + "0 worked staple 10,20.30,40.50,60 2/2/a");
+    ASSERT_TRUE(addWorked(opened(), staple("/a")));
+    EXPECT_TRUE(hasDone(staple("/a")));
 }
 
 }  // namespace
