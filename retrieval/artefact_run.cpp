@@ -156,6 +156,11 @@ Kind kindOf(const PWHashedFile& file) {
     return Kind::none;
 }
 
+bool holdsTrailersWithoutTicket(PWHashedFile& file) {
+    auto* const package = dynamic_cast<PWHashedFlatPackage*>(&file);
+    return package != nullptr && !package->ticketData() && package->hasTrailers();
+}
+
 ArtefactRun::ArtefactRun(std::string path, std::uint8_t operation, const Platform& platform)
     : path_(std::move(path)), operation_(operation), platform_(platform) {}
 
@@ -201,6 +206,13 @@ std::optional<Outcome> ArtefactRun::open(const PWHashedFile::BeforeReading& befo
     kind_ = kindOf(*reading.file);
     if (const int status = reading.file->appropriateExitCode(); status != kExitOK)
         return Outcome{status, status == kExitCannotCreate ? Cause::notWritable : Cause::notReadable};
+    if (operation_ == kOperationStaple && holdsTrailersWithoutTicket(*reading.file)) {
+        messages_.push_back(foundation::format(
+            "%@ has trailers and no ticket among them: one would be written over its first bytes. "
+            "Nothing was written to it.",
+            path_));
+        return Outcome{kExitCannotCreate, Cause::notWritable};
+    }
     filesState_ = stateBeforeReading;
     if (kind_ == Kind::bundle) {
         reading.executable = platform_.files.mainExecutableOfBundle(url);

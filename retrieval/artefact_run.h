@@ -40,6 +40,10 @@ std::string_view nameOf(Kind kind) noexcept;
 
 Kind kindOf(const PWHashedFile& file);
 
+/// Whether it is a package with trailers and no ticket among them. The core writes the next ticket over the
+/// first bytes of such a file; here it is refused.
+bool holdsTrailersWithoutTicket(PWHashedFile& file);
+
 /// False if the text holds a zero byte: a call of the system would take what comes before it for the path.
 bool isPath(const std::string& text) noexcept;
 

@@ -4,11 +4,18 @@
 #include "src/run.h"
 #include "ticket/artefact.h"
 #include "ticket/commands.h"
+#include "ticket/removable_package.h"
 
 namespace pinwell::ticket_files {
 namespace {
 
 using retrieval::Cause;
+
+// What takes the ticket away.
+std::shared_ptr<PWHashedFile> remover(const std::shared_ptr<PWHashedFile>& file, const Platform& platform) {
+    if (retrieval::kindOf(*file) != retrieval::Kind::package) return file;
+    return std::make_shared<RemovablePackage>(file->fileURL(), platform);
+}
 
 // False if the deletion failed; the error says why where that is known.
 bool deleteTicket(PWHashedFile& file, std::optional<Error>& error) {
@@ -36,9 +43,9 @@ retrieval::Report removeTicket(const std::string& path, const Platform& platform
         return end(kExitDataError, Cause::notStapled,
                    foundation::format("%@ does not have a ticket stapled to it.", name));
     std::optional<Error> error;
-    if (!deleteTicket(*artefact.file, error))
-        return end(kExitCannotCreate,
-                   artefact.file->wasRefusedAsChanged() ? Cause::changed : Cause::notWritable,
+    const auto file = remover(artefact.file, platform);
+    if (!deleteTicket(*file, error))
+        return end(kExitCannotCreate, file->wasRefusedAsChanged() ? Cause::changed : Cause::notWritable,
                    error ? foundation::format("The ticket of %@ could not be removed. %@", name, error)
                          : foundation::format("The ticket of %@ could not be removed.", name));
     // From the disk, by a new object.
@@ -52,6 +59,12 @@ retrieval::Report removeTicket(const std::string& path, const Platform& platform
             kExitOK, Cause::worked,
             foundation::format("The ticket of %@ is all that its signature holds: it stays in place.", name));
     }
+    if (retrieval::holdsTrailersWithoutTicket(*fresh))
+        return end(
+            kExitOK, Cause::worked,
+            foundation::format("The ticket of %@ has been removed. Trailers of other types stay: pinwell "
+                               "would write another ticket over its first bytes.",
+                               name));
     return end(kExitOK, Cause::worked, foundation::format("The ticket of %@ has been removed.", name));
 }
 

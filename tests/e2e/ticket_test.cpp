@@ -8,6 +8,7 @@
 
 #include "batch_fixture.h"
 #include "foundation/json.h"
+#include "support/package_builder.h"
 
 namespace pinwell::test {
 namespace {
@@ -406,6 +407,47 @@ TEST_F(TicketTool, RemoveTakesTheTicketOfEveryKind) {
             << one.name;
     }
     EXPECT_THAT(temporaryFiles(), IsEmpty());
+}
+
+TEST_F(TicketTool, APackageIsAsBeforeItsFirstStapleAfterARemove) {
+    const Artefact package = writeArtefact(signedPackage(), directory / "builds/Signed.pkg");
+    records[recordNameOf(package)] = ticketOf(package);
+    keepTickets({package});
+    for (int round = 0; round < 2; ++round) {
+        ASSERT_EQ(tool({"attach", "-q", "--tickets", tickets}, {package}).exitStatus, 0) << round;
+        ASSERT_EQ(readFile(package.path), package.stapledWith(issuedFor(package))) << round;
+        EXPECT_EQ(tool({"remove"}, {package}).exitStatus, 0) << round;
+        EXPECT_EQ(readFile(package.path), package.contents) << round;
+    }
+}
+
+TEST_F(TicketTool, TrailersOfOthersOutliveARemoveAndKeepATicketOut) {
+    const Artefact package = signedPackage();
+    const std::string ticket = foundation::toString(ticketOf(package));
+    const auto bare = [&] {
+        return PackageBuilder().archive(foundation::toData(package.contents)).terminator();
+    };
+    writeFile(directory / "builds/Signed.pkg", bare().unknown("others").ticket(ticket).build());
+    const ProcessResult removed = ticketTool({"remove", "Signed.pkg"});
+    EXPECT_EQ(removed.exitStatus, 0);
+    EXPECT_THAT(removed.output,
+                HasSubstr("Trailers of other types stay: pinwell would write another ticket over "
+                          "its first bytes."));
+    const std::string left = bare().unknown("others").build();
+    EXPECT_EQ(readFile(directory / "builds/Signed.pkg"), left);
+
+    writeFile(directory / "ticket", ticket);
+    serveTicket(foundation::toData(ticket));
+    for (const std::string& contents : {left, bare().build()}) {
+        writeFile(directory / "builds/Signed.pkg", contents);
+        const ProcessResult attached = ticketTool({"attach", "--ticket", directory / "ticket", "Signed.pkg"});
+        EXPECT_EQ(attached.exitStatus, 73);
+        EXPECT_THAT(attached.output, HasSubstr("has trailers and no ticket among them"));
+        EXPECT_THAT(reportsOf(batch({"staple", "--json", "Signed.pkg"})),
+                    ElementsAre(Reports("notWritable", 73)));
+        EXPECT_EQ(readFile(directory / "builds/Signed.pkg"), contents);
+    }
+    EXPECT_THAT(service().requests(), IsEmpty());
 }
 
 TEST_F(TicketTool, RemoveSaysThatATicketStaysWhichIsAllOfItsSignature) {
