@@ -42,6 +42,7 @@ Option flag(const char* name, char letter, const char* help, bool& value) {
 Option text(const char* name, const char* argument, const char* help, std::optional<std::string>& value) {
     return {name, 0, argument, help, [&value](const std::string& given) -> Wrong {
                 if (given.empty()) return "is empty";
+                if (value) return "is given twice";
                 value = given;
                 return std::nullopt;
             }};

@@ -4,6 +4,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <array>
 #include <cerrno>
 #include <cstdio>
 #include <cstdlib>
@@ -29,12 +30,6 @@ std::string secondsText(double seconds) {
     return std::to_string(milliseconds / 1000) + "." + std::string(3 - fraction.size(), '0') + fraction;
 }
 
-// What says something of the artefact fails; what kept it from being looked at is an error.
-bool isError(Cause cause) {
-    return cause == Cause::unreachable || cause == Cause::untrusted || cause == Cause::timedOut ||
-           cause == Cause::interrupted;
-}
-
 std::string prologue(std::string_view counts) {
     std::string text = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<testsuites>\n<testsuite ";
     text += counts;
@@ -42,6 +37,19 @@ std::string prologue(std::string_view counts) {
     return text + ">\n";
 }
 
+Error refusal(std::string text) {
+    return {foundation::kDataErrorDomain, foundation::kMalformedDocument, std::move(text)};
+}
+
+bool beginsAsXml(const std::string& path) {
+    constexpr std::string_view kBeginning = "<?xml";
+    const foundation::FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY));
+    std::array<char, kBeginning.size()> bytes{};
+    return file && ::read(file.get(), bytes.data(), bytes.size()) == static_cast<ssize_t>(bytes.size()) &&
+           std::string_view(bytes.data(), bytes.size()) == kBeginning;
+}
+
+// An option without its argument takes the first artefact for it, which must not be lost to a report.
 // What is to be replaced must be a file: a device's name would be a file's from then on. A link stays one.
 Result<std::string> placeOfReport(const std::string& path) {
     struct stat status {};
@@ -49,7 +57,9 @@ Result<std::string> placeOfReport(const std::string& path) {
         const bool isLink = ::lstat(path.c_str(), &status) == 0;
         return isLink ? Result<std::string>(Error::posix(ENOENT, path)) : path;
     }
-    if (!S_ISREG(status.st_mode)) return Error::posix(EINVAL, path);
+    if (!S_ISREG(status.st_mode)) return refusal(path + " is not a regular file.");
+    if (status.st_size > 0 && !beginsAsXml(path))
+        return refusal(path + " is there already, and is no report.");
     std::error_code failure;
     const std::string place = std::filesystem::canonical(path, failure);
     if (failure) return Error::posix(failure.value(), path);
@@ -114,7 +124,8 @@ void JUnitReport::add(const Report& report) {
         write(text + "/>\n");
         return;
     }
-    const char* const element = isError(report.cause) ? "error" : "failure";
+    // What says something of the artefact fails; what kept it from being looked at is an error.
+    const char* const element = isVerdict(report.cause) ? "failure" : "error";
     text += std::string(">\n<") + element + " type=\"" + std::string(nameOf(report.cause)) + "\" message=\"" +
             std::string(nameOf(report.cause)) + ": exit status " + std::to_string(report.exitStatus) + "\">";
     for (const std::string& message : report.messages) text += escapedForXml(message) + "\n";
@@ -124,7 +135,7 @@ void JUnitReport::add(const Report& report) {
 Result<void> JUnitReport::finish(const Summary& summary) {
     std::uint64_t errors = 0;
     for (const Cause cause : retrieval::allCauses())
-        if (isError(cause)) errors += summary.numberOf(cause);
+        if (!isVerdict(cause)) errors += summary.numberOf(cause);
     const std::uint64_t failures = summary.total - summary.numberOf(Cause::worked) - errors;
     write("</testsuite>\n</testsuites>\n");
     flush();

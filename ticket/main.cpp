@@ -37,6 +37,7 @@ Option text(const char* name, char letter, const char* argument, const char* hel
             std::optional<std::string>& value) {
     return {name, letter, argument, help, [&value](const std::string& given) -> Wrong {
                 if (given.empty()) return "is empty";
+                if (value) return "is given twice";
                 value = given;
                 return std::nullopt;
             }};

@@ -1,6 +1,7 @@
 #include "batch_fixture.h"
 
 #include <algorithm>
+#include <filesystem>
 
 #include "foundation/base64.h"
 #include "foundation/json.h"
@@ -61,6 +62,22 @@ std::vector<Artefact> BatchTest::writeImages(std::size_t count, const std::strin
     return images;
 }
 
+std::map<std::string, std::string> BatchTest::writeEveryOutcome() {
+    const auto images = writeImages(5);
+    records[recordNameOf(images[1])] = std::nullopt;
+    records[recordNameOf(images[2])] = sealed(images[2].payload().revoked());
+    records[recordNameOf(images[3])] = ticketForOthers();
+    writeFile(images[4].path, "no image");
+    writeFile(directory / "builds/plain.txt", "text");
+    return {{images[0].path, "worked"},
+            {images[1].path, "notIssued"},
+            {images[2].path, "revoked"},
+            {images[3].path, "notAcceptable"},
+            {images[4].path, "notReadable"},
+            {directory / "builds/missing.dmg", "notReadable"},
+            {directory / "builds/plain.txt", "unsupported"}};
+}
+
 std::vector<std::string> BatchTest::pathsOf(const std::vector<Artefact>& artefacts) {
     std::vector<std::string> paths;
     for (const Artefact& artefact : artefacts) paths.push_back(artefact.path);
@@ -116,6 +133,20 @@ Value BatchTest::summaryOf(const ProcessResult& result) {
     if (lines.empty()) return {};
     const auto document = foundation::parseJSON(foundation::asBytes(lines.back()));
     return document ? (*document)["summary"] : Value();
+}
+
+void BatchTest::expectWrongUsage(const std::string& program,
+                                 const std::vector<std::vector<std::string>>& lines) const {
+    for (const std::vector<std::string>& arguments : lines) {
+        Command made = command(arguments);
+        made.executable = program;
+        const ProcessResult result = runProcess(made);
+        const std::string name = std::filesystem::path(program).filename();
+        EXPECT_EQ(result.exitStatus, 64) << testing::PrintToString(arguments);
+        EXPECT_EQ(result.output, "");
+        EXPECT_THAT(linesOf(result.errors), testing::ElementsAre(testing::StartsWith(name + ": ")))
+            << testing::PrintToString(arguments);
+    }
 }
 
 void BatchTest::expectValid(const ProcessResult& result, const std::string& schema) const {

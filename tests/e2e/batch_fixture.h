@@ -33,12 +33,17 @@ class BatchTest : public EndToEndTest {
 
     /// Unsigned images, each with a hash of its own, and a genuine ticket for each in `records`.
     std::vector<Artefact> writeImages(std::size_t count, const std::string& folder = "builds/many");
+    /// Paths below "builds", one for each way in which a staple can end without a fault of service or volume,
+    /// with its cause.
+    std::map<std::string, std::string> writeEveryOutcome();
     static std::vector<std::string> pathsOf(const std::vector<Artefact>& artefacts);
     static std::string recordNameOf(const Artefact& artefact) { return "2/" + artefact.prettyHash(); }
     /// A new one, whose signature is its own.
     Data ticketOf(const Artefact& artefact) const { return sealed(artefact.payload()); }
     /// The one in `records`.
-    const Data& issuedFor(const Artefact& artefact) const { return records.at(recordNameOf(artefact)).value(); }
+    const Data& issuedFor(const Artefact& artefact) const {
+        return records.at(recordNameOf(artefact)).value();
+    }
 
     /// Answers lookups with what is in `records` then, in the order asked for.
     void serveRecords();
@@ -52,6 +57,10 @@ class BatchTest : public EndToEndTest {
     /// The lines of a run with --json, but for the summary.
     static std::vector<Value> reportsOf(const ProcessResult& result);
     static Value summaryOf(const ProcessResult& result);
+
+    /// Each of these lines, after the program's name, ends with 64 and one line that says why.
+    void expectWrongUsage(const std::string& program,
+                          const std::vector<std::vector<std::string>>& lines) const;
 
     /// Each line of the output keeps to the schema, by another program's word.
     void expectValid(const ProcessResult& result, const std::string& schema) const;

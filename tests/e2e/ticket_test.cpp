@@ -516,29 +516,24 @@ TEST_F(TicketTool, NeedsNoNetworkInterface) {
 
 TEST_F(TicketTool, WrongUsageEndsWith64AndOneLine) {
     writeFile(directory / "builds/empty", "\n\n");
-    for (const std::vector<std::string>& arguments : {std::vector<std::string>{},
-                                                      {"attch", "x"},
-                                                      {"hash"},
-                                                      {"attach", "x"},
-                                                      {"attach", "--tickets", "d", "--ticket", "f", "x"},
-                                                      {"attach", "--tickets", "", "x"},
-                                                      {"attach", "--tickets", "d"},
-                                                      {"extract"},
-                                                      {"extract", "x", "y"},
-                                                      {"remove"},
-                                                      {"fetch", "--out", tickets},
-                                                      {"fetch", recordNameOf(signedImage())},
-                                                      {"fetch", "--out", tickets, "--from", "empty"},
-                                                      {"fetch", "--out", tickets, "--retries", "x", "n"},
-                                                      {"fetch", "--out", tickets, "--deadline", "-1", "n"},
-                                                      {"hash", "--out", tickets, "x"},
-                                                      {"remove", "-Z", "x"}}) {
-        const ProcessResult result = ticketTool(arguments);
-        EXPECT_EQ(result.exitStatus, 64) << testing::PrintToString(arguments);
-        EXPECT_EQ(result.output, "");
-        EXPECT_THAT(linesOf(result.errors), ElementsAre(StartsWith("pinwell-ticket: ")))
-            << testing::PrintToString(arguments);
-    }
+    expectWrongUsage(PINWELL_TICKET_PROGRAM, {{},
+                                              {"attch", "x"},
+                                              {"hash"},
+                                              {"attach", "x"},
+                                              {"attach", "--tickets", "d", "--ticket", "f", "x"},
+                                              {"attach", "--tickets", "", "x"},
+                                              {"attach", "--tickets", "d", "--tickets", "e", "x"},
+                                              {"attach", "--tickets", "d"},
+                                              {"extract"},
+                                              {"extract", "x", "y"},
+                                              {"remove"},
+                                              {"fetch", "--out", tickets},
+                                              {"fetch", recordNameOf(signedImage())},
+                                              {"fetch", "--out", tickets, "--from", "empty"},
+                                              {"fetch", "--out", tickets, "--retries", "x", "n"},
+                                              {"fetch", "--out", tickets, "--deadline", "-1", "n"},
+                                              {"hash", "--out", tickets, "x"},
+                                              {"remove", "-Z", "x"}});
 }
 
 TEST_F(TicketTool, AnOutputThatIsFullIsAnErrorAndOneThatIsClosedIsNone) {

@@ -70,14 +70,15 @@ TEST_F(JUnit, EscapesWhatXmlHasAMeaningFor) {
 }
 
 TEST_F(JUnit, IsThereAsAWholeOrNotAtAll) {
-    writeFile(file, "the last one");
+    const std::string before = "<?xml version=\"1.0\"?><testsuites/>";
+    writeFile(file, before);
     {
         auto junit = JUnitReport::begin(file);
         ASSERT_TRUE(junit);
         junit->add(reportOf(Cause::worked));
-        EXPECT_EQ(readFile(file), "the last one");
+        EXPECT_EQ(readFile(file), before);
     }
-    EXPECT_EQ(readFile(file), "the last one");
+    EXPECT_EQ(readFile(file), before);
     EXPECT_EQ(filesThere(), 1U);
     EXPECT_THAT(written({}), HasSubstr("tests=\"0\""));
     EXPECT_EQ(filesThere(), 1U);
@@ -96,8 +97,21 @@ TEST_F(JUnit, TakesThePlaceOfNoDeviceAndNoFolder) {
     EXPECT_EQ(filesThere(), 3U);
 }
 
+// An option whose argument was forgotten takes the first artefact for it.
+TEST_F(JUnit, TakesThePlaceOfNoOtherFile) {
+    for (const std::string& contents : {std::string("koly"), std::string("<"), std::string("a list\n")}) {
+        writeFile(file, contents);
+        const auto refused = JUnitReport::begin(file);
+        ASSERT_FALSE(refused);
+        EXPECT_EQ(refused.error().localizedDescription(), file + " is there already, and is no report.");
+        EXPECT_EQ(readFile(file), contents);
+    }
+    writeFile(file, std::string_view());
+    EXPECT_TRUE(JUnitReport::begin(file));
+}
+
 TEST_F(JUnit, FollowsALinkToAFile) {
-    writeFile(directory / "real.xml", "old");
+    writeFile(directory / "real.xml", std::string_view());
     std::filesystem::create_symlink("real.xml", file);
     EXPECT_THAT(written({}), HasSubstr("testsuite"));
     EXPECT_TRUE(std::filesystem::is_symlink(file));
