@@ -1,0 +1,78 @@
+// Bundles whose code hash is what their executable holds: many artefacts with hashes of their own, without a
+// signature. From any thread.
+#pragma once
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <memory>
+#include <optional>
+#include <stdexcept>
+#include <string>
+#include <string_view>
+
+#include "foundation/bytes.h"
+#include "support/fake_code_signing.h"
+#include "support/temporary_directory.h"
+
+namespace pinwell::test {
+
+inline constexpr std::size_t kBundleHashLength = 20;
+
+/// Returns when what is written gets another time than the file has: the clock of a file system may go in
+/// steps of some milliseconds.
+inline void waitForAnotherTimeThan(const std::string& file) {
+    const std::string clock = file + ".clock";
+    struct stat of {};
+    struct stat now {};
+    if (::lstat(file.c_str(), &of) != 0) return;
+    do {
+        writeFile(clock, std::string_view("tick"));
+        if (::lstat(clock.c_str(), &now) != 0) throw std::runtime_error(clock);
+    } while (now.st_ctim.tv_sec == of.st_ctim.tv_sec && now.st_ctim.tv_nsec == of.st_ctim.tv_nsec);
+    ::unlink(clock.c_str());
+}
+
+/// Writes the bundle, with another time than one that is there. The hash is `text`, filled up with dots.
+inline void writeBundle(const std::string& path, const std::string& text) {
+    std::string hash = text;
+    hash.resize(kBundleHashLength, '.');
+    waitForAnotherTimeThan(path + "/Contents/MacOS/App");
+    writeFile(path + "/Contents/MacOS/App", hash);
+    writeFile(
+        path + "/Contents/Info.plist",
+        std::string_view("<plist><dict><key>CFBundleExecutable</key><string>App</string></dict></plist>"));
+}
+
+class HashByExecutable : public FakeCodeSigningService {
+  public:
+    /// The text of an executable that raises an exception in who asks for its hash.
+    static constexpr const char* kRaises = "raises..............";
+
+    codesign::Status createStaticCode(const foundation::URL& url, std::uint32_t,
+                                      std::shared_ptr<codesign::StaticCode>& code) override {
+        auto made = std::make_shared<Code>();
+        made->path = url.path();
+        code = std::move(made);
+        return codesign::kSuccess;
+    }
+    codesign::Status checkValidity(codesign::StaticCode&, std::uint32_t) override {
+        return codesign::kSuccess;
+    }
+    codesign::Status copySigningInformation(codesign::StaticCode& code, std::uint32_t,
+                                            std::optional<codesign::SigningInformation>& out) override {
+        const std::string hash = readFile(dynamic_cast<Code&>(code).path + "/Contents/MacOS/App");
+        if (hash == kRaises) throw std::runtime_error("nobody has thought of this");
+        out.emplace();
+        out->unique = foundation::toData(hash);
+        out->digestAlgorithm = 2;
+        return codesign::kSuccess;
+    }
+
+  private:
+    struct Code : codesign::StaticCode {
+        std::string path;
+    };
+};
+
+}  // namespace pinwell::test
