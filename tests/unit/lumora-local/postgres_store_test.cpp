@@ -9,6 +9,7 @@
 #include "lumora-local/history.h"
 #include "lumora-local/postgres_needs.h"
 #include "postgres_cluster.h"
+#include "sample_record.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -16,15 +17,9 @@ namespace {
 using foundation::Data;
 using foundation::Date;
 using test::PostgresCluster;
-
-constexpr Environment kProduction = Environment::production;
-
-const Occasion kOccasion{Date{100}, "tester", std::nullopt, "", false};
-
-SignedRecord makeRecord(const std::string& name, std::string_view ticket = "ticket") {
-    return {{name, "Sample.app", {{2, Data(20, std::byte{1})}}, false, false, Date{77}},
-            foundation::toData(ticket)};
-}
+using test::kOccasion;
+using test::kProduction;
+using test::makeRecord;
 
 PostgresPlace placeOf(const std::string& url) {
     return {.url = url, .named = "service.json: \"store\""};

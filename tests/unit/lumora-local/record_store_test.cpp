@@ -10,6 +10,7 @@
 #include "lumora-local/failure.h"
 #include "lumora-local/history.h"
 #include "lumora-local/sha256.h"
+#include "sample_record.h"
 #include "store_kinds.h"
 
 namespace pinwell::lumora {
@@ -17,20 +18,9 @@ namespace {
 
 using foundation::Data;
 using foundation::Date;
-
-constexpr Environment kProduction = Environment::production;
-
-const Occasion kOccasion{Date{100}, "tester", std::nullopt, "", false};
-
-SignedRecord makeRecord(const std::string& name, std::string_view ticket) {
-    return {{name,
-             "Sample.app",
-             {{2, Data(20, std::byte{1})}, {4, Data(48, std::byte{2})}},
-             false,
-             false,
-             Date{77}},
-            foundation::toData(ticket)};
-}
+using test::kOccasion;
+using test::kProduction;
+using test::makeRecord;
 
 class RecordStoreTest : public testing::TestWithParam<std::string> {
   protected:

@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 
 #include "lumora-local/failure.h"
+#include "sample_record.h"
 #include "support/temporary_directory.h"
 
 namespace pinwell::lumora {
@@ -14,20 +15,9 @@ using foundation::Data;
 using foundation::Date;
 using pinwell::test::TemporaryDirectory;
 using pinwell::test::writeFile;
-
-constexpr Environment kProduction = Environment::production;
-
-const Occasion kOccasion{Date{100}, "tester", std::nullopt, "", false};
-
-SignedRecord makeRecord(const std::string& name, std::string_view ticket) {
-    return {{name,
-             "Sample.app",
-             {{2, Data(20, std::byte{1})}, {4, Data(48, std::byte{2})}},
-             false,
-             false,
-             Date{77}},
-            foundation::toData(ticket)};
-}
+using test::kOccasion;
+using test::kProduction;
+using test::makeRecord;
 
 class SqliteStoreTest : public testing::Test {
   protected:

@@ -5,6 +5,7 @@
 
 #include "killed_child.h"
 #include "lumora-local/history.h"
+#include "sample_record.h"
 #include "store_kinds.h"
 
 namespace pinwell::lumora {
@@ -12,11 +13,11 @@ namespace {
 
 using foundation::Data;
 using foundation::Date;
+using test::kProduction;
 
-constexpr Environment kProduction = Environment::production;
 constexpr int kMoreCallsThanAChangeMakes = 5000;
 
-SignedRecord makeRecord(const std::string& name, bool revoked) {
+SignedRecord statedRecord(const std::string& name, bool revoked) {
     Data hash = foundation::toData(name);  // each record's own: none gets around a revoked one
     hash.resize(20);
     return {{name, "Sample.app", {{2, hash}}, revoked, false, Date{7}},
@@ -58,7 +59,7 @@ TEST_P(StoreCrashTest, KeepsEveryAcknowledgedIssue) {
     for (bool ended = false; !ended; ++call) {
         ASSERT_LT(call, kMoreCallsThanAChangeMakes);
         const std::string name = "record-" + std::to_string(call);
-        const test::KilledChild child = putAndKillAt(call, makeRecord(name, false));
+        const test::KilledChild child = putAndKillAt(call, statedRecord(name, false));
         ended = child.reachedTheEnd;
         ASSERT_TRUE(!ended || child.acknowledged) << child.said;
         const bool found = store->findTicket(kProduction, name).has_value();
@@ -78,8 +79,8 @@ TEST_P(StoreCrashTest, KeepsEveryAcknowledgedRevocation) {
     for (int call = 1, ended = 0; ended == 0; ++call) {
         ASSERT_LT(call, kMoreCallsThanAChangeMakes);
         const std::string name = "record-" + std::to_string(call);
-        put(makeRecord(name, false));
-        const test::KilledChild child = putAndKillAt(call, makeRecord(name, true));
+        put(statedRecord(name, false));
+        const test::KilledChild child = putAndKillAt(call, statedRecord(name, true));
         ended = child.reachedTheEnd ? 1 : 0;
         ASSERT_TRUE(ended == 0 || child.acknowledged) << child.said;
         const auto record = store->find(kProduction, name);
