@@ -60,6 +60,7 @@ std::optional<Answer> refuseHead(const HttpRequest& request) {
     if (codings == 1 && !boost::beast::iequals(request[http::field::transfer_encoding], "chunked")) {
         return requestRefusal(400);
     }
+    if (request.count(http::field::host) > 1) return requestRefusal(400);  // RFC 9112, 3.2
     if (request.target().size() > kMaximumTargetLength) return requestRefusal(414);
     return std::nullopt;
 }

@@ -138,6 +138,12 @@ TEST_F(HostileClient, IsUnclearAboutTheLength) {
     expectRefusal(answerTo(lookupHead("Connection: close\r\n")), 411);
 }
 
+TEST_F(HostileClient, NamesTwoHosts) {
+    const std::string length = "Content-Length: 2\r\n";
+    expectRefusal(answerTo(lookupHead("Host: another.example\r\n" + length) + "{}"), 400);
+    expectRefusal(answerTo(lookupHead("Host: localhost\r\n" + length) + "{}"), 400);
+}
+
 TEST_F(HostileClient, CompressesItsBody) {
     expectRefusal(answerTo(lookupHead("Content-Encoding: gzip\r\nContent-Length: 2\r\n") + "{}"), 415);
 }
