@@ -85,7 +85,9 @@ sandbox::Confinement confinementOfReading(const std::vector<std::string>& artefa
     sandbox::Confinement confinement;
     confinement.calls = sandbox::Calls::reading;
     confinement.files = commonFiles(platform);
-    for (const std::string& path : artefacts) confinement.files.push_back({path, Access::read});
+    // By the paths that are opened: without a slash at the end, for one.
+    for (const std::string& path : artefacts)
+        confinement.files.push_back({URL::fileURLWithPath(path).path(), Access::read});
     return confinement;
 }
 

@@ -71,6 +71,13 @@ TEST_F(Inspect, IsContentWithWhatTheToolHasStapled) {
                 Ended(0, Contains("  The ticket is genuine and is not marked revoked.")));
 }
 
+TEST_F(Inspect, ReadsTheSameFileWhateverSlashesAndDotsArePutBehindItsName) {
+    const std::vector<std::string> paths = artefacts(true);
+    for (const std::string& path : paths)
+        for (const char* ending : {"/", "//", "/.", "/./"})
+            EXPECT_EQ(inspect({path + ending}).exitStatus, 0) << path << ending;
+}
+
 TEST_F(Inspect, EndsWith65WithoutAGoodTicket) {
     for (const std::string& path : artefacts(false))
         EXPECT_THAT(inspect({path}), Ended(65, Contains("  No ticket is stapled to this file.")));
