@@ -197,10 +197,16 @@ class Examination {
     void checkLeafPurpose(const CertificateExtensions& leaf) {
         if (!leaf.purposes || !leaf.purposes->serverAuthentication)
             fail(0, "the certificate is not for server authentication");
-        // The uses that are consistent with the purpose, by the same section.
-        constexpr std::uint32_t kTls =
-            kKeyUsageDigitalSignature | kKeyUsageKeyEncipherment | kKeyUsageKeyAgreement;
-        if (leaf.keyUsage && (*leaf.keyUsage & kTls) == 0) fail(0, "the key usage does not permit TLS");
+        if (leaf.keyUsage && (*leaf.keyUsage & usesOfTls()) == 0)
+            fail(0, "the key usage does not permit TLS");
+    }
+
+    /// Servers sign in TLS (RFC 8446, 4.4.2.2), and with the RSA key exchange of TLS 1.2 they decrypt instead
+    /// (RFC 5246, 7.4.2). Key agreement with the certificate's own key is not offered.
+    std::uint32_t usesOfTls() const {
+        const auto& key = certificates_.front()->publicKey();
+        const bool isRsa = key && key->type() == kKeyTypeRSA;
+        return kKeyUsageDigitalSignature | (isRsa ? kKeyUsageKeyEncipherment : 0U);
     }
 
     void checkChainAsAWhole() {
