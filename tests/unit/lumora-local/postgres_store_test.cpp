@@ -5,6 +5,7 @@
 
 #include <thread>
 
+#include "commit_cutter.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/history.h"
 #include "lumora-local/postgres_needs.h"
@@ -16,10 +17,11 @@ namespace {
 
 using foundation::Data;
 using foundation::Date;
-using test::PostgresCluster;
+using test::CommitCutter;
 using test::kOccasion;
 using test::kProduction;
 using test::makeRecord;
+using test::PostgresCluster;
 
 PostgresPlace placeOf(const std::string& url) {
     return {.url = url, .named = "service.json: \"store\""};
@@ -229,6 +231,57 @@ TEST_F(LostDatabase, AReplicaServesLookupsAndTakesNoChanges) {
     primary.put(kProduction, {makeRecord("b")}, kOccasion);
     while (!store.findTicket(kProduction, "b")) std::this_thread::sleep_for(std::chrono::milliseconds(20));
     EXPECT_THROW(store.put(kProduction, {makeRecord("c")}, kOccasion), Failure);
+}
+
+/// A store whose commits get lost.
+class DoubtfulCommit : public PostgresStoreTest {
+  protected:
+    void SetUp() override {
+        PostgresStoreTest::SetUp();
+        if (IsSkipped()) return;
+        PostgresCluster& cluster = PostgresCluster::shared();
+        cutter_ = std::make_unique<CommitCutter>(cluster.socketDirectory());
+        std::string url = cluster.makeDatabase();
+        PostgresStore::create(placeOf(url));
+        url.replace(url.find(cluster.socketDirectory()), cluster.socketDirectory().size(),
+                    cutter_->directory());
+        place_ = placeOf(url);
+    }
+
+    void expectOneEvent(PostgresStore& store) {
+        EXPECT_EQ(cutter_->cuts(), 1);
+        EXPECT_EQ(verifyHistory(store, std::nullopt).events, 1U);
+        EXPECT_EQ(store.countRecords(), 1U);
+    }
+
+    std::unique_ptr<CommitCutter> cutter_;
+    PostgresPlace place_;
+};
+
+TEST_F(DoubtfulCommit, IsRepeatedIfTheServerNeverHeardOfIt) {
+    PostgresStore store(place_);
+    cutter_->cut(CommitCutter::Cut::commit);
+    EXPECT_NO_THROW(store.put(kProduction, {makeRecord("a")}, kOccasion));
+    expectOneEvent(store);
+}
+
+TEST_F(DoubtfulCommit, IsNotRepeatedIfTheServerHasIt) {
+    PostgresStore store(place_);
+    cutter_->cut(CommitCutter::Cut::answer);
+    EXPECT_NO_THROW(store.put(kProduction, {makeRecord("a")}, kOccasion));
+    expectOneEvent(store);
+}
+
+TEST_F(DoubtfulCommit, OfAServerThatFallsSilentIsWaitedForABoundedTime) {
+    PostgresStore store(place_);
+    EXPECT_FALSE(store.findTicket(kProduction, "a"));
+    cutter_->cut(CommitCutter::Cut::all);
+    EXPECT_EQ(failureOf([&] { store.findTicket(kProduction, "a"); }).exitStatus(), EX_TEMPFAIL);
+    EXPECT_EQ(failureOf([&] { store.put(kProduction, {makeRecord("a")}, kOccasion); }).exitStatus(),
+              EX_TEMPFAIL);
+    expectRefused(place_, "does not answer in time");
+    cutter_->cut(CommitCutter::Cut::nothing);
+    EXPECT_NO_THROW(store.put(kProduction, {makeRecord("a")}, kOccasion));
 }
 
 }  // namespace

@@ -1,0 +1,51 @@
+// Something between a store and its database that loses a commit, or the answer to it, or never answers.
+#pragma once
+
+#include <atomic>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "foundation/file_io.h"
+#include "support/temporary_directory.h"
+
+namespace pinwell::lumora::test {
+
+class CommitCutter {
+  public:
+    enum class Cut {
+        nothing,
+        commit,  // the connection ends before the server hears of the commit
+        answer,  // it ends after the server has committed
+        all,     // nothing reaches the server, and nothing comes from it
+    };
+
+    /// Passes connections on to the server whose socket is in that directory.
+    explicit CommitCutter(std::string serverDirectory);
+    ~CommitCutter();
+    CommitCutter(const CommitCutter&) = delete;
+    CommitCutter& operator=(const CommitCutter&) = delete;
+
+    /// The directory of its own socket.
+    const std::string& directory() const { return directory_.path(); }
+
+    /// What it does to the next commit; then it passes everything on again.
+    void cut(Cut cut) { next_ = cut; }
+
+    int cuts() const { return cuts_; }
+
+  private:
+    void listen();
+    void pass(foundation::FileDescriptor client);
+
+    const std::string serverDirectory_;
+    const pinwell::test::TemporaryDirectory directory_;
+    foundation::FileDescriptor listener_;
+    std::atomic<Cut> next_{Cut::nothing};
+    std::atomic<int> cuts_{0};
+    std::atomic<bool> stopping_{false};
+    std::thread thread_;
+    std::vector<std::thread> connections_;
+};
+
+}  // namespace pinwell::lumora::test
