@@ -95,8 +95,8 @@ void PostgresConnection::Finish::operator()(pg_conn* connection) const {
     PQfinish(connection);
 }
 
-PostgresConnection::PostgresConnection(const std::string& url, Deadline deadline) {
-    connect(url, deadline);
+PostgresConnection::PostgresConnection(const std::string& url, Deadline deadline, const std::string& user) {
+    connect(url, user, deadline);
     PQsetNoticeProcessor(
         connection_.get(), [](void*, const char*) {}, nullptr);
     if (PQsetnonblocking(connection_.get(), 1) != 0) lose("the connection cannot be used without blocking");
@@ -105,19 +105,29 @@ PostgresConnection::PostgresConnection(const std::string& url, Deadline deadline
 
 PostgresConnection::~PostgresConnection() = default;
 
-void PostgresConnection::connect(const std::string& url, Deadline deadline) {
-    // What comes before "dbname" can be set otherwise in the URL; what comes after it cannot.
-    constexpr std::array<const char*, 9> kKeywords{"fallback_application_name",
-                                                   "gssencmode",
-                                                   "tcp_user_timeout",
-                                                   "keepalives_idle",
-                                                   "keepalives_interval",
-                                                   "keepalives_count",
-                                                   "dbname",
-                                                   "client_encoding",
-                                                   nullptr};
-    const std::array<const char*, 9> values{"lumora-local", "disable", "4000", "10", "5", "3",
-                                            url.c_str(),    "UTF8",    nullptr};
+void PostgresConnection::connect(const std::string& url, const std::string& user, Deadline deadline) {
+    // What comes before "dbname" can be set otherwise in the URL; what comes after it cannot. A keyword
+    // without a value is as if it were absent.
+    constexpr std::array<const char*, 10> kKeywords{"fallback_application_name",
+                                                    "user",
+                                                    "gssencmode",
+                                                    "tcp_user_timeout",
+                                                    "keepalives_idle",
+                                                    "keepalives_interval",
+                                                    "keepalives_count",
+                                                    "dbname",
+                                                    "client_encoding",
+                                                    nullptr};
+    const std::array<const char*, 10> values{"lumora-local",
+                                             user.empty() ? nullptr : user.c_str(),
+                                             "disable",
+                                             "4000",
+                                             "10",
+                                             "5",
+                                             "3",
+                                             url.c_str(),
+                                             "UTF8",
+                                             nullptr};
     connection_.reset(PQconnectStartParams(kKeywords.data(), values.data(), 1));
     if (connection_ == nullptr) lose("out of memory");
     PostgresPollingStatusType next = PGRES_POLLING_WRITING;

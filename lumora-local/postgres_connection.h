@@ -87,8 +87,9 @@ class PostgresConnection {
   public:
     /// Connects to what the URL (or the text of keywords) names. Each session has UTF-8 as its encoding, the
     /// schema `lumora` as its search path, commits that are on the server's disk before it says so, and a
-    /// bound on statements and locks.
-    PostgresConnection(const std::string& url, Deadline deadline);
+    /// bound on statements and locks. `user` is who connects if neither the URL nor the environment says so;
+    /// empty: the library asks the system for the caller's name.
+    PostgresConnection(const std::string& url, Deadline deadline, const std::string& user = {});
     ~PostgresConnection();
     PostgresConnection(const PostgresConnection&) = delete;
     PostgresConnection& operator=(const PostgresConnection&) = delete;
@@ -115,7 +116,7 @@ class PostgresConnection {
         void operator()(pg_conn* connection) const;
     };
 
-    void connect(const std::string& url, Deadline deadline);
+    void connect(const std::string& url, const std::string& user, Deadline deadline);
     void waitFor(short events, Deadline deadline);
     void flush(Deadline deadline);
     void send(const char* sql, const std::vector<PostgresParameter>& parameters, Deadline deadline);

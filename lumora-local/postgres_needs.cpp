@@ -51,6 +51,13 @@ PostgresNeeds postgresNeeds(const std::string& url, const std::string& named) {
 
     PostgresNeeds needs;
     needs.tcp = namesAHost(values["host"]) || namesAHost(values["hostaddr"]);
+    if (values["sslrootcert"] == "system") {
+        values.erase("sslrootcert");
+        for (const char* path :
+             {"/etc/ssl", "/usr/share/ca-certificates", "/usr/local/share/ca-certificates"}) {
+            needs.files.emplace_back(path);
+        }
+    }
     for (const char* key : {"passfile", "sslcert", "sslkey", "sslrootcert", "sslcrl", "sslcrldir"}) {
         if (!values[key].empty()) needs.files.push_back(values[key]);
     }
@@ -59,6 +66,12 @@ PostgresNeeds postgresNeeds(const std::string& url, const std::string& named) {
         needs.files.push_back(std::string(home) + "/.postgresql");
     }
     return needs;
+}
+
+std::string defaultPostgresUser() {
+    std::map<std::string, std::string> values;
+    addTo(values, Options(PQconndefaults()));
+    return values["user"];
 }
 
 }  // namespace pinwell::lumora

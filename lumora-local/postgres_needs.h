@@ -15,4 +15,7 @@ struct PostgresNeeds {
 /// Throws Failure (EX_CONFIG) if the URL cannot be read; `named` says where it is from.
 PostgresNeeds postgresNeeds(const std::string& url, const std::string& named);
 
+/// Who connects if the URL does not say so: $PGUSER, or the caller's login name. Empty if that is not known.
+std::string defaultPostgresUser();
+
 }  // namespace pinwell::lumora

@@ -2,6 +2,8 @@
 
 #include <algorithm>
 
+#include "lumora-local/postgres_needs.h"
+
 namespace pinwell::lumora {
 namespace {
 
@@ -10,6 +12,9 @@ using Clock = std::chrono::steady_clock;
 constexpr std::chrono::seconds kConnectTime{5};
 
 }  // namespace
+
+PostgresPool::PostgresPool(std::string url, std::size_t maximum)
+    : url_(std::move(url)), user_(defaultPostgresUser()), maximum_(maximum) {}
 
 PostgresPool::Lease::~Lease() {
     if (connection_ == nullptr) return;
@@ -39,7 +44,7 @@ PostgresPool::Lease PostgresPool::take(Deadline deadline) {
 std::unique_ptr<PostgresConnection> PostgresPool::open(Deadline deadline) {
     const Deadline begin = Clock::now();
     try {
-        return std::make_unique<PostgresConnection>(url_, std::min(deadline, begin + kConnectTime));
+        return std::make_unique<PostgresConnection>(url_, std::min(deadline, begin + kConnectTime), user_);
     } catch (const PostgresError& error) {
         {
             const std::lock_guard lock(mutex_);

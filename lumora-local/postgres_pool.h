@@ -36,8 +36,9 @@ class PostgresPool {
         bool discarded_ = false;
     };
 
-    /// Opens no connection yet.
-    PostgresPool(std::string url, std::size_t maximum) : url_(std::move(url)), maximum_(maximum) {}
+    /// Opens no connection yet. Finds out who the caller is: a process that has given up its rights no longer
+    /// can.
+    PostgresPool(std::string url, std::size_t maximum);
 
     /// Waits for a free connection until the deadline, or opens one, which takes five seconds at most. A
     /// server that let an attempt wait is not tried again for as long. Throws PostgresError.
@@ -51,6 +52,7 @@ class PostgresPool {
     void giveBack(std::unique_ptr<PostgresConnection> connection) noexcept;
 
     const std::string url_;
+    const std::string user_;
     const std::size_t maximum_;
     std::mutex mutex_;
     std::condition_variable freed_;

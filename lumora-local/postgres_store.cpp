@@ -225,15 +225,28 @@ template <class Work>
 void PostgresStore::walking(Work work) {
     if (guard_) guard_(StoreUse::reading);
     try {
-        auto connection = pool_.take(Clock::now() + kReadingTime);
-        connection.discard();
-        connection->execute(kBeginWalk, Clock::now() + kReadingTime);
+        auto connection = beginWalk();
         work(*connection);
         connection->execute("COMMIT", Clock::now() + kReadingTime);
         connection.keep();
     } catch (const PostgresError& error) {
         pool_.closeIdle();
         throw asFailure(error);
+    }
+}
+
+PostgresPool::Lease PostgresStore::beginWalk() {
+    const Deadline deadline = Clock::now() + kReadingTime;
+    for (bool again = false;; again = true) {
+        try {
+            auto connection = pool_.take(deadline);
+            connection.discard();
+            connection->execute(kBeginWalk, deadline);
+            return connection;
+        } catch (const PostgresError& error) {
+            if (!error.lost() || again) throw;
+            pool_.closeIdle();
+        }
     }
 }
 

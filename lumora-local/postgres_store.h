@@ -52,6 +52,7 @@ class PostgresStore final : public RecordStore {
     auto reading(Work work);
     template <class Work>
     void walking(Work work);
+    PostgresPool::Lease beginWalk();
     std::string putOnce(Environment environment, const std::vector<SignedRecord>& records,
                         const Occasion& occasion, Deadline deadline);
     bool wasCommitted(const std::string& eventHash, Deadline deadline);

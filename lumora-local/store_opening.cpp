@@ -96,6 +96,7 @@ std::unique_ptr<RecordStore> openStore(const ServiceDirectory& directory) {
 }
 
 void addStoreRights(sandbox::Confinement& rights, const ServiceDirectory& directory) {
+    sandbox::append(rights.files, sandbox::fileAndItsLinks(directory.descriptionPath()));
     if (!directory.storeUrl()) {
         sandbox::append(rights.files,
                         sandbox::fileAndItsLinks(directory.storePath(), sandbox::Access::write));
@@ -120,6 +121,7 @@ std::unique_ptr<RecordStore> openStore(const ServiceDirectory& directory) {
 }
 
 void addStoreRights(sandbox::Confinement& rights, const ServiceDirectory& directory) {
+    sandbox::append(rights.files, sandbox::fileAndItsLinks(directory.descriptionPath()));
     sandbox::append(rights.files, sandbox::fileAndItsLinks(directory.storePath(), sandbox::Access::write));
 }
 

@@ -197,6 +197,9 @@ TEST_F(LostDatabase, ThatCameBackIsNotNoticed) {
     EXPECT_TRUE(store.findTicket(kProduction, "a"));
     cluster_->stopImmediately();
     cluster_->start();
+    EXPECT_EQ(store.list(kProduction).size(), 1U);
+    cluster_->stopImmediately();
+    cluster_->start();
     EXPECT_NO_THROW(store.put(kProduction, {makeRecord("b")}, kOccasion));
     EXPECT_EQ(verifyHistory(store, std::nullopt).events, 2U);
 }

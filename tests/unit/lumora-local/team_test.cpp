@@ -7,6 +7,7 @@
 #include "foundation/format.h"
 #include "lumora-local/history.h"
 #include "lumora-local/postgres_store.h"
+#include "lumora-local/service_place.h"
 #include "postgres_cluster.h"
 #include "serving_instance.h"
 
@@ -44,7 +45,11 @@ class Team : public testing::Test {
     void SetUp() override {
         if (const auto reason = PostgresCluster::missing()) GTEST_SKIP() << *reason;
         cluster_ = std::make_unique<PostgresCluster>();
-        place_ = {.url = cluster_->makeDatabase(), .named = "test"};
+        std::string url = cluster_->makeDatabase();
+        // Nobody says who connects: the service has to know that also once it has given up its rights.
+        cluster_->sql(url, "CREATE ROLE \"" + nameOfCaller() + "\" SUPERUSER LOGIN");
+        url.erase(url.find("&user="));
+        place_ = {.url = url, .named = "test"};
         service_ = test::makeService(directory_, "service");
         const ProcessResult moved = test::runLumora({"migrate", service_, "--to", place_.url});
         ASSERT_EQ(moved.exitStatus, 0) << moved.errors;
