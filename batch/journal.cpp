@@ -47,8 +47,8 @@ std::string orUnknown(const std::string& text) {
     return text.empty() ? std::string(kUnknown) : text;
 }
 
-std::string stateAndName(std::string_view state, std::string_view recordName) {
-    return std::string(state) + " " + std::string(recordName);
+TextDigest stateAndName(std::string_view state, std::string_view recordName) {
+    return digestOf(std::string(state) + " " + std::string(recordName));
 }
 
 std::optional<std::array<std::string_view, kFields>> fieldsOf(std::string_view line) {
@@ -124,14 +124,14 @@ void Journal::readLine(std::string_view line) {
     const auto ofOperation = worked_.find(operation);
     if (ofOperation == worked_.end()) return;
     if (status != "0" || cause != nameOf(Cause::worked) || state == kUnknown || recordName == kUnknown)
-        ofOperation->second.erase(std::string(path));
+        ofOperation->second.erase(digestOf(path));
     else
-        ofOperation->second.insert_or_assign(std::string(path), stateAndName(state, recordName));
+        ofOperation->second.insert_or_assign(digestOf(path), stateAndName(state, recordName));
 }
 
 bool Journal::hasDone(const JournalItem& item) const {
     const auto& ofOperation = worked_.find(nameOfOperation(item.operation))->second;
-    const auto found = ofOperation.find(escaped(item.path));
+    const auto found = ofOperation.find(digestOf(escaped(item.path)));
     return found != ofOperation.end() && found->second == stateAndName(item.filesState, item.recordName);
 }
 

@@ -22,6 +22,7 @@
 #include <string_view>
 #include <unordered_map>
 
+#include "batch/selection.h"
 #include "foundation/error.h"
 #include "foundation/file_io.h"
 #include "retrieval/cause.h"
@@ -66,9 +67,13 @@ class Journal {
     foundation::FileDescriptor file_;
     bool endsWithinALine_ = false;  // since a write was cut short
 
-    // By the operation's name, and by the path as it is in the file: the state and the record's name.
-    std::map<std::string, std::unordered_map<std::string, std::string>, std::less<>> worked_{
-        {"staple", {}}, {"validate", {}}};
+    // By the operation's name, and by the path as it is in the file: the state and the record's name. As
+    // digests, so that a long journal takes some 60 bytes a path.
+    struct FirstHalf {
+        std::size_t operator()(const TextDigest& digest) const noexcept { return digest.first; }
+    };
+    using ByPath = std::unordered_map<TextDigest, TextDigest, FirstHalf>;
+    std::map<std::string, ByPath, std::less<>> worked_{{"staple", {}}, {"validate", {}}};
 };
 
 }  // namespace pinwell::batch

@@ -50,33 +50,38 @@ std::string canonicalPath(const std::string& path) {
     return canonical + name;
 }
 
-bool TextSet::add(std::string_view text) {
+TextDigest digestOf(std::string_view text) {
     const foundation::Data bytes = codesign::digest(codesign::DigestType::sha256, foundation::asBytes(text));
-    Digest digest;
+    TextDigest digest;
     std::memcpy(&digest.first, bytes.data(), sizeof digest.first);
     std::memcpy(&digest.second, bytes.data() + sizeof digest.first, sizeof digest.second);
-    if (digest == Digest{}) digest.second = 1;  // zeros mark a free place
+    return digest;
+}
+
+bool TextSet::add(std::string_view text) {
+    TextDigest digest = digestOf(text);
+    if (digest == TextDigest{}) digest.second = 1;  // zeros mark a free place
     if ((count_ + 1) * 4 > places_.size() * 3) grow();
     if (!place(digest)) return false;
     ++count_;
     return true;
 }
 
-bool TextSet::place(const Digest& digest) {
+bool TextSet::place(const TextDigest& digest) {
     const std::size_t mask = places_.size() - 1;
     for (std::size_t at = digest.first & mask;; at = (at + 1) & mask) {
         if (places_[at] == digest) return false;
-        if (places_[at] != Digest{}) continue;
+        if (places_[at] != TextDigest{}) continue;
         places_[at] = digest;
         return true;
     }
 }
 
 void TextSet::grow() {
-    const std::vector<Digest> before =
-        std::exchange(places_, std::vector<Digest>(places_.empty() ? kFirstPlaces : places_.size() * 2));
-    for (const Digest& digest : before)
-        if (digest != Digest{}) place(digest);
+    const std::vector<TextDigest> before =
+        std::exchange(places_, std::vector<TextDigest>(places_.empty() ? kFirstPlaces : places_.size() * 2));
+    for (const TextDigest& digest : before)
+        if (digest != TextDigest{}) place(digest);
 }
 
 Selection::Choice Selection::choose(const std::string& path) {

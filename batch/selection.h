@@ -18,7 +18,11 @@ std::uint64_t partOf(std::string_view path, std::uint64_t parts);
 /// The last component's own link is not followed.
 std::string canonicalPath(const std::string& path);
 
-/// A set of texts that keeps 16 bytes of each: SHA-256, cut.
+/// 16 bytes in the place of a text: SHA-256, cut.
+using TextDigest = std::pair<std::uint64_t, std::uint64_t>;
+TextDigest digestOf(std::string_view text);
+
+/// A set of texts that keeps the digest of each.
 class TextSet {
   public:
     /// False if it was there before.
@@ -26,11 +30,10 @@ class TextSet {
     std::size_t size() const noexcept { return count_; }
 
   private:
-    using Digest = std::pair<std::uint64_t, std::uint64_t>;
     void grow();
-    bool place(const Digest& digest);
+    bool place(const TextDigest& digest);
 
-    std::vector<Digest> places_;  // a power of two; zeros: free
+    std::vector<TextDigest> places_;  // a power of two; zeros: free
     std::size_t count_ = 0;
 };
 
