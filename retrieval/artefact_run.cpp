@@ -72,7 +72,7 @@ class KeptSessions : public https::SessionService {
     std::shared_ptr<KeptSession> last_;
 };
 
-Platform withSessions(Platform platform, https::SessionService& sessions) {
+Platform withSessions(const Platform& platform, https::SessionService& sessions) {
     return {platform.files,     platform.types,     platform.codeSigning,
             platform.trust,     sessions,           platform.userDefaults,
             platform.systemLog, platform.directory, [](int status) { throw RunEnded{status}; }};

@@ -29,11 +29,12 @@ constexpr std::array kRows{
     Row{Cause::interrupted, "interrupted"},
 };
 
-constexpr auto kCauses = [] {
+constexpr std::array<Cause, kRows.size()> causesOfRows() {
     std::array<Cause, kRows.size()> causes{};
     for (std::size_t i = 0; i < kRows.size(); ++i) causes.at(i) = kRows.at(i).cause;
     return causes;
-}();
+}
+constexpr auto kCauses = causesOfRows();
 
 // The later, the worse.
 constexpr std::array kByWeight{
