@@ -246,6 +246,7 @@ int run(int argc, char** argv) {
         complain(companion::describe(app, error));
         return EX_USAGE;
     }
+    if (options.output == "-") options.output.clear();
     try {
         options.policy = policy.combined();
     } catch (const PolicyError& error) {

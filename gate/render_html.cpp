@@ -29,6 +29,17 @@ th, td { text-align: left; vertical-align: top; padding: .3rem .6rem .3rem 0; bo
   overflow-wrap: anywhere; }
 td.value { font-family: ui-monospace, monospace; font-size: .85em; }
 summary { cursor: pointer; margin-top: .6rem; }
+@media (max-width: 48rem) {
+  thead { display: none; }
+  table, tbody, tr, td { display: block; }
+  tr { border-top: 1px solid var(--line); padding: .4rem 0; }
+  td { border: 0; padding: 0; }
+  td:nth-child(n+3):not(:empty)::before { font: .9rem system-ui, sans-serif; opacity: .7; }
+  td:nth-child(3)::before { content: "Place: "; }
+  td:nth-child(4)::before { content: "Expected: "; }
+  td:nth-child(5)::before { content: "Found: "; }
+  td:empty { display: none; }
+}
 @media print { details > * { display: revert; } }
 )";
 

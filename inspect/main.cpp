@@ -7,15 +7,14 @@
 #include <atomic>
 #include <csignal>
 #include <cstdint>
-#include <cstdio>
 #include <exception>
 #include <string>
 #include <vector>
 
+#include "companion/command_line.h"
 #include "companion/output.h"
 #include "companion/parse_errors.h"
 #include "companion/version.h"
-#include "foundation/format.h"
 #include "foundation/process.h"
 #include "foundation/stack_guard.h"
 #include "inspect/gather.h"
@@ -38,8 +37,7 @@ struct Arguments {
 };
 
 void complain(std::string_view text) {
-    const std::string line = "pinwell-inspect: " + std::string(text) + "\n";
-    std::fwrite(line.data(), 1, line.size(), stderr);
+    companion::complain("pinwell-inspect", text);
 }
 
 /// From here on: what it was given is read, and nothing is written, started or connected to. A kernel that
@@ -126,7 +124,7 @@ int main(int argc, char** argv) {
     try {
         return run(argc, argv);
     } catch (const std::exception& error) {
-        complain(foundation::escapeForTerminal(error.what()));
+        complain(error.what());
         return EX_SOFTWARE;
     }
 }

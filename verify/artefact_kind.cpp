@@ -58,8 +58,8 @@ std::string_view nameOf(Kind kind) {
 }
 
 OpenedArtefact openArtefact(const foundation::URL& url, const Platform& platform) {
-    if (const auto properties = platform.files.resourceProperties(url); !properties)
-        return refused("The path cannot be read: " + reasonOf(properties.error()) + ".");
+    const auto properties = platform.files.resourceProperties(url);
+    if (!properties) return refused("The path cannot be read: " + reasonOf(properties.error()) + ".");
     const auto regular = platform.files.isRegularFile(url);
     const bool isFile = regular && *regular;
     if (isFile) {
@@ -68,6 +68,8 @@ OpenedArtefact openArtefact(const foundation::URL& url, const Platform& platform
     }
     std::shared_ptr<PWHashedFile> file = PWHashedFile::initWithFileURL(url, platform);
     const auto kind = file ? kindOf(*file, isFile, url.path()) : std::nullopt;
+    if (!kind && properties->isSymbolicLink)
+        return refused("This is a symbolic link; what it leads to must be named.");
     if (!kind) return refused("This is of no kind that carries a ticket.");
     return {std::move(file), *kind, {}};
 }

@@ -223,6 +223,10 @@ class PackageCheck {
         return data.isAttribute ? path + ", extended attribute" : path;
     }
 
+    static std::string wantedOf(const ArchivedData& data) {
+        return data.checksum.empty() ? "an archived checksum" : foundation::toHex(data.checksum);
+    }
+
     struct Fault {
         const ArchivedData* data;
         Outcome outcome;
@@ -245,8 +249,7 @@ class PackageCheck {
         FailureList failures(section_, kArchivedFile);
         checkNames(failures);
         for (Fault& fault : faults)
-            failures.add(fault.outcome, placeOf(*fault.data), foundation::toHex(fault.data->checksum),
-                         std::move(fault.found));
+            failures.add(fault.outcome, placeOf(*fault.data), wantedOf(*fault.data), std::move(fault.found));
         if (failures.count() == 0)
             section_.pass(kArchivedFile, "heap", format("%zu entries with their checksums", all.size()));
     }

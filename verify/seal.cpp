@@ -3,6 +3,7 @@
 #include <re2/re2.h>
 
 #include <algorithm>
+#include <cmath>
 #include <utility>
 
 #include "codesign/code_error.h"
@@ -95,7 +96,11 @@ SealedEntry entryFrom(const std::string& path, const Value& value) {
 }
 
 double weightOf(const Value& value) {
-    if (value.real() != nullptr) return *value.real();
+    if (!value.isNumber() || value.boolean() != nullptr) refuse("a weight of the seal's rules is no number");
+    if (value.real() != nullptr) {
+        if (std::isnan(*value.real())) refuse("a weight of the seal's rules is no number");
+        return *value.real();
+    }
     if (value.integer() != nullptr) return static_cast<double>(*value.integer());
     return static_cast<double>(value.unsignedIntegerValue());
 }

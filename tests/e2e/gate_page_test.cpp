@@ -156,6 +156,24 @@ TEST_F(GatePage, CanBePictured) {
     EXPECT_EQ(reader.be32("height"), 600U);
 }
 
+TEST_F(GatePage, GivesEveryCellRoomOnANarrowScreen) {
+    flip(application() + "/Contents/Resources/ReadMe.txt", 0);
+    std::string page = readFile(pageOf({application(), image()}));
+    // Without the page's own policy, so that a script can measure it.
+    const std::size_t policy = page.find("<meta http-equiv");
+    page.erase(policy, page.find('>', policy) + 1 - policy);
+    page +=
+        "<script>const widths = [...document.querySelectorAll('section > table td:not(:empty)')]"
+        ".map(cell => cell.offsetWidth); document.title = `${widths.length} cells, narrowest "
+        "${Math.min(...widths) < 200 ? 'too narrow' : 'wide enough'}, page "
+        "${document.documentElement.scrollWidth > innerWidth ? 'too wide' : 'fits'}`;</script>";
+    writeFile(directory / "measured.html", std::string_view(page));
+    const ProcessResult result =
+        chromium({"--window-size=400,800", "--dump-dom", "file://" + (directory / "measured.html")});
+    EXPECT_THAT(result.output, HasSubstr(" cells, narrowest wide enough, page fits</title>"));
+    EXPECT_THAT(result.output, Not(HasSubstr("<title>0 cells")));
+}
+
 TEST_F(GatePage, RunsNothingAndAsksNobodyWhateverNamesAre) {
     const EmptyServer server;
     const std::string script = "<script>document.title='run'</script>";

@@ -219,6 +219,7 @@ TEST_F(GateReport, GoesToAFile) {
     EXPECT_THAT(gate({"--offline", "-o", file, application(), image(), package()}), Ended(0, IsEmpty()));
     EXPECT_THAT(gate({"--offline", "-o", file, image()}), Ended(0, IsEmpty()));
     EXPECT_EQ(readFile(file), gate({"--offline", image()}).output);
+    EXPECT_THAT(gate({"--offline", "-o", "-", image()}), Ended(0, testing::SizeIs(1)));
     const ProcessResult impossible = gate({"--offline", "-o", directory / "none/report", image()});
     EXPECT_EQ(impossible.exitStatus, 73);
     EXPECT_THAT(impossible.errors,

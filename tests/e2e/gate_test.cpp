@@ -356,6 +356,10 @@ TEST_F(Gate, EndsWith66ForWhatIsNoArtefact) {
     writeFile(directory / "text", std::string_view("text\n"));
     EXPECT_EQ(gate({"--offline", directory / "text"}).exitStatus, 66);
     EXPECT_EQ(gate({"--offline", directory / "missing"}).exitStatus, 66);
+    makeLink(image(), directory / "link.dmg");
+    const ProcessResult link = gate({"--offline", directory / "link.dmg"});
+    EXPECT_EQ(link.exitStatus, 66);
+    EXPECT_THAT(link.output, HasSubstr("This is a symbolic link; what it leads to must be named."));
 }
 
 TEST_F(Gate, OfSeveralPathsTheWorstDecides) {

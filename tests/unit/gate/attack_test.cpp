@@ -2,6 +2,7 @@
 #include <gmock/gmock.h>
 #include <sys/stat.h>
 
+#include <algorithm>
 #include <filesystem>
 
 #include "codesign/byte_source.h"
@@ -133,7 +134,7 @@ TEST_F(AttackedBundle, IsRefusedForAnUnsignedSliceOfItsProgram) {
 
 // Packages.
 
-std::vector<std::string> failuresOfTable(const std::string& files) {
+std::vector<verify::Check> checksOfTable(const std::string& files) {
     const Data archive = ArchiveBuilder()
                              .toc(
                                  "<?xml version=\"1.0\" encoding=\"UTF-8\"?><xar><toc><checksum "
@@ -145,8 +146,12 @@ std::vector<std::string> failuresOfTable(const std::string& files) {
     verify::Workers workers(1);
     verify::Section section;
     verify::verifyPackage(codesign::MemorySource(archive), workers, section);
+    return verify::flattened(section);
+}
+
+std::vector<std::string> failuresOfTable(const std::string& files) {
     std::vector<std::string> failures;
-    for (const verify::Check& check : verify::flattened(section))
+    for (const verify::Check& check : checksOfTable(files))
         if (check.outcome == Outcome::failed) failures.push_back(check.name + ": " + check.place);
     return failures;
 }
@@ -176,6 +181,17 @@ TEST(PackageTable, IsRefusedForTwoEntriesOfOneFile) {
                 Contains("archived-file: a"));
     EXPECT_THAT(failuresOfTable(fileNamed("d", fileNamed("a") + fileNamed("a"))),
                 Contains("archived-file: d/a"));
+}
+
+TEST(PackageTable, SaysWhatItMissesOfAnEntryWithoutAChecksum) {
+    const std::string data = "<data><offset>20</offset><length>4</length></data>";
+    const std::vector<verify::Check> checks = checksOfTable(fileNamed("a", data));
+    const auto isFault = [](const verify::Check& check) {
+        return check.place == "a" && check.outcome == Outcome::failed;
+    };
+    const auto fault = std::find_if(checks.begin(), checks.end(), isFault);
+    ASSERT_NE(fault, checks.end());
+    EXPECT_EQ(fault->expected, "an archived checksum");
 }
 
 TEST(PackageTable, IsRefusedForRangesThatOverlapOrLeadOutside) {
