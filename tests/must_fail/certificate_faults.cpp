@@ -84,6 +84,9 @@ const std::vector<CertificateFault>& certificateFaults() {
         {"PurposesEmpty", "an empty list of purposes; no option of the ticket policy", "444 555 555", [](C& c, Chain&) { c.extendedKeyUsage.clear(); replace(c, kPurposes, false, bytes({0x30, 0})); }},
         {"PurposesOfClientsMailAndTheMarker", "for three purposes that are not a server's", "444 555 555", [](C& c, Chain&) { c.extendedKeyUsage = "critical,clientAuth,emailProtection,1.2.840.177245.100.6.27.2"; }},
         {"KeyUsageOfSignaturesThatLast", "the key usage is non-repudiation alone, which allows no TLS", "4-- 5-- 5--", [](C& c, Chain&) { c.keyUsage = "critical,nonRepudiation"; }},
+        {"KeyUsageOfKeyAgreement", "the key usage is key agreement alone; servers sign in TLS", "4-- 5-- 5--", [](C& c, Chain&) { c.keyUsage = "critical,keyAgreement"; }},
+        {"KeyUsageOfKeyEncipherment", "the key usage is key encipherment alone, and the key can only sign", "4-- 5-- 5--", [](C& c, Chain&) { c.keyUsage = "critical,keyEncipherment"; }},
+        {"KeyUsageOfTheClientsPartOfAKeyAgreement", "the key usage is key agreement, for encipherment only", "4-- 5-- 5--", [](C& c, Chain&) { c.keyUsage = "critical,keyAgreement,encipherOnly"; }},
         {"KeyUsageOfAnAuthority", "a leaf's key usage is that of an authority, which allows no TLS", "4-- 5-- 5--", [](C& c, Chain&) { c.keyUsage = "critical,keyCertSign,cRLSign"; }},
         {"KeyUsageOfDataNotCritical", "a leaf's key usage is data encipherment, in an extension that is not critical", "4-- 5-- 5--", [](C& c, Chain&) { c.keyUsage = "dataEncipherment"; }},
         // Name constraints: of a server's issuers, critical or not. The ticket policy does not apply them, so that they
