@@ -488,6 +488,17 @@ TEST_F(DiskImage, WithNothingButATicketMakesItsHashWhenAsked) {
     EXPECT_EQ(image.syntheticCDHash(), std::nullopt);
 }
 
+TEST_F(DiskImage, WithAnInvalidSignatureHasTheHashThatIsMadeUp) {
+    platform.codeSigning.validity = codesign::kInvalidSignature;
+    platform.codeSigning.information.emplace();
+    platform.codeSigning.information->unique = Data(48, std::byte{0xAB});
+    platform.codeSigning.information->digestAlgorithm = 4;
+    put(DiskImageBuilder().superblob(DiskImageBuilder::signature()));
+    auto image = open();
+    EXPECT_EQ(image.cdHash(), syntheticHash());
+    EXPECT_EQ(image.digestAlgorithm(), 2U);
+}
+
 TEST_F(DiskImage, WhoseHashCannotBeMadeWhenAskedHasNone) {
     put(DiskImageBuilder().superblob(SuperBlobBuilder().blob(0x10002, test::ticketBlob("TICKET"))));
     auto image = open();
