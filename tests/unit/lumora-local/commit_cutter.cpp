@@ -56,8 +56,8 @@ bool sendAll(const FileDescriptor& socket, std::string_view bytes) {
 
 }  // namespace
 
-CommitCutter::CommitCutter(std::string serverDirectory) : serverDirectory_(std::move(serverDirectory)) {
-    listener_ = makeSocket();
+CommitCutter::CommitCutter(std::string serverDirectory)
+    : serverDirectory_(std::move(serverDirectory)), listener_(makeSocket()) {
     const sockaddr_un address = addressIn(directory_.path());
     require(::bind(listener_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0,
             "bind");

@@ -83,15 +83,17 @@ void PostgresCluster::makeFolders() {
 }
 
 Command PostgresCluster::asOwner(const std::string& program, std::vector<std::string> arguments) const {
-    Command command{.executable = programs() + "/" + program,
+    Command command{.executable = "/usr/bin/setpriv",
                     .environment = {{"PATH", "/usr/sbin:/usr/bin:/sbin:/bin"}, {"LC_ALL", "C"}},
                     .workingDirectory = directory_.path()};
+    // A server does not outlive its test, whatever ends that.
+    std::vector<std::string> before{"--pdeathsig", "QUIT"};
     if (::getuid() == 0) {
         const std::string user = std::to_string(kNobody);
-        arguments.insert(arguments.begin(),
-                         {"--reuid", user, "--regid", user, "--clear-groups", "--", command.executable});
-        command.executable = "/usr/bin/setpriv";
+        before.insert(before.end(), {"--reuid", user, "--regid", user, "--clear-groups"});
     }
+    before.insert(before.end(), {"--", programs() + "/" + program});
+    arguments.insert(arguments.begin(), before.begin(), before.end());
     command.arguments = std::move(arguments);
     return command;
 }

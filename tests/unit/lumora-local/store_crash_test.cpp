@@ -1,6 +1,7 @@
 // What is in a store after whoever was changing it was killed, at each of its system calls.
 #include <gtest/gtest.h>
 
+#include <functional>
 #include <memory>
 
 #include "killed_child.h"
@@ -39,11 +40,14 @@ class StoreCrashTest : public testing::TestWithParam<std::string> {
     /// Puts a record in a child that is killed at that call.
     test::KilledChild putAndKillAt(int call, const SignedRecord& record) {
         std::unique_ptr<RecordStore> store;
-        return test::runAndKillAt(
+        const test::KilledChild child = test::runAndKillAt(
             call, [&] { store = kind_->open({}); },
             [&] {
                 store->put(kProduction, {record}, {Date{100}, "tester", Reason::compromised, "", false});
             });
+        // A server may still be at work on a commit whose client has gone.
+        kind_->open({})->holdStill([](const std::function<void()>&) {});
+        return child;
     }
 
     std::unique_ptr<test::StoreKind> kind_;
