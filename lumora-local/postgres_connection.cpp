@@ -172,19 +172,19 @@ pg_result* PostgresConnection::nextResult(Deadline deadline) {
 
 PostgresRows PostgresConnection::lastResult(Deadline deadline) {
     PostgresRows last(nullptr);
-    std::optional<PostgresError> first;
+    std::unique_ptr<pg_result, decltype(&PQclear)> failure(nullptr, &PQclear);
     while (pg_result* result = nextResult(deadline)) {
         const ExecStatusType status = PQresultStatus(result);
-        last = PostgresRows(result);
-        if (status == PGRES_COMMAND_OK || status == PGRES_TUPLES_OK || first) continue;
-        try {
-            fail(result);
-        } catch (const PostgresError& error) {
-            first = error;
-            if (!usable_) break;
+        if (status == PGRES_COMMAND_OK || status == PGRES_TUPLES_OK) {
+            last = PostgresRows(result);
+        } else if (failure == nullptr) {
+            failure.reset(result);
+        } else {
+            PQclear(result);
         }
+        if (PQstatus(connection_.get()) != CONNECTION_OK) break;
     }
-    if (first) throw *first;
+    if (failure != nullptr) fail(failure.get());
     return last;
 }
 
