@@ -1,7 +1,7 @@
 # Bare Debian systems in folders, for scripts/check-platforms. Sourced; $cache is a folder that is kept.
 #
-# All commands in a root run in a mount and a process namespace of their own. So the kernel undoes every mount and ends
-# every process with the command, whatever becomes of this script.
+# All commands in a root run in a mount and a process namespace of their own. So the kernel undoes every mount, with the
+# loop device behind it, and ends every process with the command, whatever becomes of this script.
 
 : "${cache:?}"
 running=
@@ -73,21 +73,16 @@ in_root() {
     set -e
     root=$1 packages=$2 objects=$3
     shift 3
-    mount --bind "$root" "$root"  # a program in it can only have mounts of its own if it begins at one
+    mount --bind "$root" "$root"
     mount -t proc proc "$root/proc"
     mount --rbind /sys "$root/sys"
     mount --rbind /dev "$root/dev"
     mount --bind "$packages" "$root/var/cache/apt/archives"
     [ -z "$objects" ] || mount --bind "$objects" "$root/var/cache/pinwell-objects"
-    exec chroot "$root" env -i PATH=/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin HOME=/root TERM=dumb \
-      ${objects:+CCACHE_DIR=/var/cache/pinwell-objects} bash -c "cd /root/pinwell && exec \"\$@\"" in-root "$@"
+    # In a root by chroot alone, the kernel lets no program make name spaces of its own.
+    cd "$root"
+    pivot_root . mnt
+    exec chroot . env -i PATH=/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin HOME=/root TERM=dumb \
+      ${objects:+CCACHE_DIR=/var/cache/pinwell-objects} bash -c "umount --lazy /mnt && cd /root/pinwell && exec \"\$@\"" in-root "$@"
   ' in-root "$root" "$cache/packages-$number" "${objects:-}" "$@"
-}
-
-# detach_loops FOLDER: frees the loop devices of files below a folder, which tests that were ended may have left.
-detach_loops() {
-  local device file
-  losetup --list --noheadings --output NAME,BACK-FILE 2> /dev/null | while read -r device file; do
-    case $file in "$1"/*) losetup --detach "$device" || true ;; esac
-  done
 }
