@@ -56,7 +56,7 @@ make_bare() {
 
 # unpack_bare NUMBER ROOT: a fresh system in a folder, with the network's settings of this one.
 unpack_bare() {
-  mkdir -p "$2"
+  mkdir -p "$2/etc/dpkg/dpkg.cfg.d"
   tar --extract --file="$cache/debian-$1.tar" --directory="$2" --numeric-owner --same-permissions || return 1
   cp /etc/resolv.conf "$2/etc/resolv.conf"
   echo force-unsafe-io > "$2/etc/dpkg/dpkg.cfg.d/no-sync"  # it is thrown away, and waiting for disks takes minutes
