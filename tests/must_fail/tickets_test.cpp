@@ -105,7 +105,7 @@ class AnswerTable : public testing::TestWithParam<AnswerFault> {};
 
 TEST_P(AnswerTable, EndsWithItsExitCode) {
     const AnswerFault& fault = GetParam();
-    const Subject& subject = subjectNamed("package");
+    const Subject subject = subjectNamed("package");
     ToolRun tool({{signers().root.der}, {}, {}, {}});
     const std::string path = tool.path(subject.fileName);
     subject.write(path, goodTicket(subject, signers()));
