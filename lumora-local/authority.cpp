@@ -1,5 +1,6 @@
 #include "lumora-local/authority.h"
 
+#include "lumora-local/certificate_file.h"
 #include "lumora-local/certificate_maker.h"
 #include "lumora-local/endpoint.h"
 #include "lumora-local/key_file.h"
@@ -13,21 +14,8 @@ using foundation::Date;
 // RFC 5280, appendix A: ub-common-name.
 constexpr std::size_t kMaximumCommonNameLength = 64;
 
-std::string contentsOf(BIO* bio) {
-    char* text = nullptr;
-    const long length = BIO_get_mem_data(bio, &text);
-    return {text, static_cast<std::size_t>(length)};
-}
-
-Identity toPem(const IssuedCertificate& issued) {
-    const BioHandle certificate(BIO_new(BIO_s_mem()));
-    const BioHandle key(BIO_new(BIO_s_secmem()));
-    require(certificate != nullptr && key != nullptr &&
-                PEM_write_bio_X509(certificate.get(), issued.certificate.get()) == 1 &&
-                PEM_write_bio_PKCS8PrivateKey(key.get(), issued.key.get(), nullptr, nullptr, 0, nullptr,
-                                              nullptr) == 1,
-            "encode a certificate");
-    return {contentsOf(certificate.get()), contentsOf(key.get())};
+Identity toPem(const IssuedCertificate& issued, std::string_view passphrase) {
+    return {encodeCertificate(issued.certificate.get()), encodeKey(issued.key.get(), passphrase)};
 }
 
 /// Canonical hosts hold no character that the configuration syntax gives a meaning.
@@ -40,36 +28,83 @@ std::string subjectAlternativeName(const std::vector<std::string>& hosts) {
     return names;
 }
 
+CertificateProfile rootProfile() {
+    return {.commonName = "Lumora Local Root",
+            .basicConstraints = "critical,CA:TRUE",
+            .keyUsage = "critical,keyCertSign,cRLSign"};
+}
+
+CertificateProfile intermediateProfile() {
+    return {.commonName = "Lumora Local Ticket Authority",
+            .basicConstraints = "critical,CA:TRUE,pathlen:0",
+            .keyUsage = "critical,keyCertSign,cRLSign",
+            .markerOid = kTicketIntermediateMarkerOid};
+}
+
+CertificateProfile signerProfile() {
+    return {.commonName = "Lumora Local Ticket Signer",
+            .basicConstraints = "critical,CA:FALSE",
+            .keyUsage = "critical,digitalSignature",
+            .markerOid = kTicketSignerMarkerOid};
+}
+
+CertificateProfile serverProfile(const std::vector<std::string>& hosts) {
+    return {.commonName = hosts.front().substr(0, kMaximumCommonNameLength),
+            .basicConstraints = "critical,CA:FALSE",
+            .keyUsage = "critical,digitalSignature",
+            .extendedKeyUsage = "serverAuth",
+            .subjectAlternativeName = subjectAlternativeName(hosts),
+            .markerOid = kServerMarkerOid};
+}
+
+IssuedCertificate readIssuer(const IssuerFiles& files) {
+    IssuedCertificate issuer{readCertificateFile(files.certificate),
+                             readKeyFile(files.key, files.passphraseFile)};
+    if (X509_check_private_key(issuer.certificate.get(), issuer.key.get()) != 1) {
+        ERR_clear_error();
+        throw Failure(EX_CONFIG, foundation::format("the key in %@ is not the one of the certificate in %@",
+                                                    files.key, files.certificate));
+    }
+    return issuer;
+}
+
 }  // namespace
 
 Identity::~Identity() {
     wipe(privateKey);
 }
 
-Authority createAuthority(const std::vector<std::string>& hosts, Date now) {
-    const CertificateProfile rootProfile{.commonName = "Lumora Local Root",
-                                         .basicConstraints = "critical,CA:TRUE",
-                                         .keyUsage = "critical,keyCertSign,cRLSign"};
-    const CertificateProfile intermediateProfile{.commonName = "Lumora Local Ticket Authority",
-                                                 .basicConstraints = "critical,CA:TRUE,pathlen:0",
-                                                 .keyUsage = "critical,keyCertSign,cRLSign",
-                                                 .markerOid = kTicketIntermediateMarkerOid};
-    const CertificateProfile signerProfile{.commonName = "Lumora Local Ticket Signer",
-                                           .basicConstraints = "critical,CA:FALSE",
-                                           .keyUsage = "critical,digitalSignature",
-                                           .markerOid = kTicketSignerMarkerOid};
-    const CertificateProfile serverProfile{.commonName = hosts.front().substr(0, kMaximumCommonNameLength),
-                                           .basicConstraints = "critical,CA:FALSE",
-                                           .keyUsage = "critical,digitalSignature",
-                                           .extendedKeyUsage = "serverAuth",
-                                           .subjectAlternativeName = subjectAlternativeName(hosts),
-                                           .markerOid = kServerMarkerOid};
+Authority createAuthority(const std::vector<std::string>& hosts, Date now, std::string_view passphrase) {
+    const IssuedCertificate root = issueCertificate(rootProfile(), nullptr, now);
+    const IssuedCertificate intermediate = issueCertificate(intermediateProfile(), &root, now);
+    const IssuedCertificate signer = issueCertificate(signerProfile(), &intermediate, now);
+    const IssuedCertificate server = issueCertificate(serverProfile(hosts), &root, now);
+    return {toPem(root, passphrase), toPem(intermediate, passphrase), toPem(signer, passphrase),
+            toPem(server, passphrase)};
+}
 
-    const IssuedCertificate root = issueCertificate(rootProfile, nullptr, now);
-    const IssuedCertificate intermediate = issueCertificate(intermediateProfile, &root, now);
-    const IssuedCertificate signer = issueCertificate(signerProfile, &intermediate, now);
-    const IssuedCertificate server = issueCertificate(serverProfile, &root, now);
-    return {toPem(root), toPem(intermediate), toPem(signer), toPem(server)};
+Identity issueSigner(const IssuerFiles& intermediate, Date now, std::string_view passphrase) {
+    const IssuedCertificate issuer = readIssuer(intermediate);
+    return toPem(issueCertificate(signerProfile(), &issuer, now), passphrase);
+}
+
+std::string certifySigner(const IssuerFiles& intermediate, foundation::ByteView publicKey, Date now) {
+    const IssuedCertificate issuer = readIssuer(intermediate);
+    const unsigned char* der = octets(publicKey);
+    const KeyHandle key(d2i_PUBKEY(nullptr, &der, static_cast<long>(publicKey.size())));
+    require(key != nullptr, "read a public key");
+    return encodeCertificate(certifyKey(signerProfile(), key.get(), issuer, now).get());
+}
+
+Identity issueServer(const IssuerFiles& root, const std::vector<std::string>& hosts, Date now,
+                     std::string_view passphrase) {
+    const IssuedCertificate issuer = readIssuer(root);
+    return toPem(issueCertificate(serverProfile(hosts), &issuer, now), passphrase);
+}
+
+Identity requestSigner(std::string_view passphrase) {
+    const KeyHandle key = makeKey(KeyKind::ellipticCurveP256);
+    return {requestCertificate(signerProfile(), key.get()), encodeKey(key.get(), passphrase)};
 }
 
 }  // namespace pinwell::lumora

@@ -14,6 +14,7 @@
 #include <utility>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "foundation/date.h"
 
 namespace pinwell::lumora {
@@ -44,7 +45,30 @@ struct Authority {
 
 /// Fresh keys and certificates, valid from a day before `now` (clocks differ) for ten years: an isolated site
 /// has nobody to renew them. `hosts` are canonical (endpoint.h) and not empty; the first is the server's
-/// common name. Throws Failure when the cryptographic library fails.
-Authority createAuthority(const std::vector<std::string>& hosts, foundation::Date now);
+/// common name. The keys are encrypted unless `passphrase` is empty. Throws Failure when the cryptographic
+/// library fails.
+Authority createAuthority(const std::vector<std::string>& hosts, foundation::Date now,
+                          std::string_view passphrase = {});
+
+/// Where an issuer's certificate and key are.
+struct IssuerFiles {
+    std::string certificate;
+    std::string key;
+    std::string passphraseFile;  // passphrase.h; empty: the key is in the clear
+};
+
+/// A fresh signer. Throws Failure, also if key and certificate of the issuer do not belong together.
+Identity issueSigner(const IssuerFiles& intermediate, foundation::Date now, std::string_view passphrase);
+
+/// A signer's certificate, in PEM, for the key with this SubjectPublicKeyInfo. Throws Failure.
+std::string certifySigner(const IssuerFiles& intermediate, foundation::ByteView publicKey,
+                          foundation::Date now);
+
+/// A fresh server certificate. Throws Failure as issueSigner does.
+Identity issueServer(const IssuerFiles& root, const std::vector<std::string>& hosts, foundation::Date now,
+                     std::string_view passphrase);
+
+/// A fresh signer's key and, in the place of the certificate, the request for one (RFC 2986, PEM).
+Identity requestSigner(std::string_view passphrase);
 
 }  // namespace pinwell::lumora

@@ -22,6 +22,12 @@ constexpr int kSerialNumberBits = 159;
 // The markers count by their presence alone; their value is an ASN.1 NULL.
 constexpr std::array<unsigned char, 2> kMarkerValue{0x05, 0x00};
 
+void releaseExtensions(STACK_OF(X509_EXTENSION) * list) {
+    sk_X509_EXTENSION_pop_free(list, X509_EXTENSION_free);
+}
+
+using RequestHandle = foundation::Handle<X509_REQ, X509_REQ_free>;
+using ExtensionListHandle = foundation::Handle<STACK_OF(X509_EXTENSION), releaseExtensions>;
 using BigNumberHandle = foundation::Handle<BIGNUM, BN_free>;
 using ObjectHandle = foundation::Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
 using OctetStringHandle = foundation::Handle<ASN1_OCTET_STRING, ASN1_OCTET_STRING_free>;
@@ -35,13 +41,12 @@ void setSerialNumber(X509* certificate) {
             "choose a serial number");
 }
 
-void setSubject(X509* certificate, const std::string& commonName) {
-    X509_NAME* subject = X509_get_subject_name(certificate);
+void addNames(X509_NAME* subject, const std::string& commonName) {
     const auto add = [&](const char* field, std::string_view text) {
         const foundation::ByteView bytes = foundation::asBytes(text);
         require(X509_NAME_add_entry_by_txt(subject, field, MBSTRING_UTF8, octets(bytes),
                                            static_cast<int>(bytes.size()), -1, 0) == 1,
-                "set a certificate's subject");
+                "set a subject");
     };
     add("O", "Lumora Local");
     add("CN", commonName);
@@ -63,41 +68,38 @@ void addExtension(X509* certificate, X509* issuer, int identifier, const std::st
             "add a certificate extension");
 }
 
-void addMarker(X509* certificate, std::string_view oid) {
+ExtensionHandle markerExtension(std::string_view oid) {
     const ObjectHandle object(OBJ_txt2obj(std::string(oid).c_str(), 1));
     const OctetStringHandle value(ASN1_OCTET_STRING_new());
     require(object != nullptr && value != nullptr &&
                 ASN1_OCTET_STRING_set(value.get(), kMarkerValue.data(), kMarkerValue.size()) == 1,
             "make a certificate marker");
-    const ExtensionHandle extension(X509_EXTENSION_create_by_OBJ(nullptr, object.get(), 0, value.get()));
-    require(extension != nullptr && X509_add_ext(certificate, extension.get(), -1) == 1,
-            "add a certificate marker");
+    ExtensionHandle extension(X509_EXTENSION_create_by_OBJ(nullptr, object.get(), 0, value.get()));
+    require(extension != nullptr, "make a certificate marker");
+    return extension;
 }
 
-KeyHandle makeKey(KeyKind kind) {
-    return KeyHandle(kind == KeyKind::rsa2048 ? EVP_RSA_gen(2048) : EVP_EC_gen("P-256"));
+void addMarker(X509* certificate, std::string_view oid) {
+    require(X509_add_ext(certificate, markerExtension(oid).get(), -1) == 1, "add a certificate marker");
 }
 
-}  // namespace
+CertificateHandle makeCertificate(const CertificateProfile& profile, EVP_PKEY* subject, X509* issuerOrSelf,
+                                  EVP_PKEY* issuerKey, Date now) {
+    CertificateHandle made(X509_new());
+    require(made != nullptr, "make a certificate");
+    X509* certificate = made.get();
+    X509* issuer = issuerOrSelf != nullptr ? issuerOrSelf : certificate;
 
-IssuedCertificate issueCertificate(const CertificateProfile& profile, const IssuedCertificate* issuer,
-                                   Date now) {
-    IssuedCertificate made{CertificateHandle(X509_new()), makeKey(profile.keyKind)};
-    require(made.certificate != nullptr && made.key != nullptr, "make a key");
-    X509* certificate = made.certificate.get();
-    const IssuedCertificate& parent = issuer != nullptr ? *issuer : made;
-
-    require(X509_set_version(certificate, X509_VERSION_3) == 1 &&
-                X509_set_pubkey(certificate, made.key.get()) == 1,
+    require(X509_set_version(certificate, X509_VERSION_3) == 1 && X509_set_pubkey(certificate, subject) == 1,
             "make a certificate");
     setSerialNumber(certificate);
-    setSubject(certificate, profile.commonName);
+    addNames(X509_get_subject_name(certificate), profile.commonName);
     setValidity(certificate, now);
-    require(X509_set_issuer_name(certificate, X509_get_subject_name(parent.certificate.get())) == 1,
+    require(X509_set_issuer_name(certificate, X509_get_subject_name(issuer)) == 1,
             "set a certificate's issuer");
 
     const auto add = [&](int identifier, const std::string& value) {
-        if (!value.empty()) addExtension(certificate, parent.certificate.get(), identifier, value);
+        if (!value.empty()) addExtension(certificate, issuer, identifier, value);
     };
     add(NID_basic_constraints, profile.basicConstraints);
     add(NID_key_usage, profile.keyUsage);
@@ -107,8 +109,65 @@ IssuedCertificate issueCertificate(const CertificateProfile& profile, const Issu
     add(NID_subject_alt_name, profile.subjectAlternativeName);
     if (!profile.markerOid.empty()) addMarker(certificate, profile.markerOid);
 
-    require(X509_sign(certificate, parent.key.get(), EVP_sha256()) > 0, "sign a certificate");
+    require(X509_sign(certificate, issuerKey, EVP_sha256()) > 0, "sign a certificate");
     return made;
+}
+
+}  // namespace
+
+KeyHandle makeKey(KeyKind kind) {
+    KeyHandle key(kind == KeyKind::rsa2048 ? EVP_RSA_gen(2048) : EVP_EC_gen("P-256"));
+    require(key != nullptr, "make a key");
+    return key;
+}
+
+CertificateHandle certifyKey(const CertificateProfile& profile, EVP_PKEY* subject,
+                             const IssuedCertificate& issuer, Date now) {
+    return makeCertificate(profile, subject, issuer.certificate.get(), issuer.key.get(), now);
+}
+
+IssuedCertificate issueCertificate(const CertificateProfile& profile, const IssuedCertificate* issuer,
+                                   Date now) {
+    IssuedCertificate made{nullptr, makeKey(profile.keyKind)};
+    made.certificate =
+        makeCertificate(profile, made.key.get(), issuer != nullptr ? issuer->certificate.get() : nullptr,
+                        issuer != nullptr ? issuer->key.get() : made.key.get(), now);
+    return made;
+}
+
+std::string requestCertificate(const CertificateProfile& profile, EVP_PKEY* key) {
+    const RequestHandle request(X509_REQ_new());
+    require(request != nullptr && X509_REQ_set_version(request.get(), X509_REQ_VERSION_1) == 1 &&
+                X509_REQ_set_pubkey(request.get(), key) == 1,
+            "make a certificate request");
+    addNames(X509_REQ_get_subject_name(request.get()), profile.commonName);
+    ExtensionListHandle extensions(sk_X509_EXTENSION_new_null());
+    require(extensions != nullptr, "make a certificate request");
+    const auto add = [&](ExtensionHandle extension) {
+        require(extension != nullptr && sk_X509_EXTENSION_push(extensions.get(), extension.get()) > 0,
+                "add an extension to a certificate request");
+        static_cast<void>(extension.release());  // the list has it
+    };
+    X509V3_CTX context;
+    X509V3_set_ctx_nodb(&context);
+    X509V3_set_ctx(&context, nullptr, nullptr, request.get(), nullptr, 0);
+    const auto addText = [&](int identifier, const std::string& value) {
+        if (!value.empty()) {
+            add(ExtensionHandle(X509V3_EXT_conf_nid(nullptr, &context, identifier, value.c_str())));
+        }
+    };
+    addText(NID_basic_constraints, profile.basicConstraints);
+    addText(NID_key_usage, profile.keyUsage);
+    if (!profile.markerOid.empty()) add(markerExtension(profile.markerOid));
+    require(X509_REQ_add_extensions(request.get(), extensions.get()) == 1 &&
+                X509_REQ_sign(request.get(), key, EVP_sha256()) > 0,
+            "sign a certificate request");
+    const BioHandle pem(BIO_new(BIO_s_mem()));
+    require(pem != nullptr && PEM_write_bio_X509_REQ(pem.get(), request.get()) == 1,
+            "encode a certificate request");
+    char* text = nullptr;
+    const long length = BIO_get_mem_data(pem.get(), &text);
+    return {text, static_cast<std::size_t>(length)};
 }
 
 }  // namespace pinwell::lumora

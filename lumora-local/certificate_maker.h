@@ -33,6 +33,16 @@ struct CertificateProfile {
     KeyKind keyKind = KeyKind::ellipticCurveP256;
 };
 
+KeyHandle makeKey(KeyKind kind);
+
+/// A certificate for the key `subject`, of which the public half is enough, signed by `issuer`; as
+/// issueCertificate otherwise.
+CertificateHandle certifyKey(const CertificateProfile& profile, EVP_PKEY* subject,
+                             const IssuedCertificate& issuer, foundation::Date now);
+
+/// A certification request (RFC 2986) in PEM, which asks for `profile` and is signed by the key.
+std::string requestCertificate(const CertificateProfile& profile, EVP_PKEY* key);
+
 /// A certificate for a fresh key, signed by `issuer`, or by itself when there is none; valid from a day
 /// before `now` (clocks differ) for ten years (an isolated site has nobody to renew it). Throws Failure when
 /// the cryptographic library fails.

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <string>
+#include <string_view>
 
 #include "lumora-local/openssl_handles.h"
 
@@ -11,10 +12,15 @@ namespace pinwell::lumora {
 /// before it has allocated any, before everything else in main; returns false if it is too late.
 bool wipeWhatOpenSSLFrees() noexcept;
 
-/// Reads the PEM file of an unencrypted private key. Whatever buffers its text went through are wiped; the
-/// key's own memory is wiped when its last reference goes. Throws Failure (EX_NOINPUT when the file cannot be
-/// read).
-KeyHandle readKeyFile(const std::string& path);
+/// Reads the PEM file of a private key; an encrypted one is opened with the passphrase at `passphraseFile`
+/// (passphrase.h), which is read only then. Whatever buffers its text went through are wiped; the key's own
+/// memory is wiped when its last reference goes. Throws Failure: EX_NOINPUT if a file cannot be read,
+/// EX_CONFIG if the key is encrypted and no passphrase opens it.
+KeyHandle readKeyFile(const std::string& path, const std::string& passphraseFile = {});
+
+/// PKCS #8 in PEM: in the clear if the passphrase is empty, otherwise encrypted (PBES2 with scrypt and
+/// AES-256). The caller wipes what is returned.
+std::string encodeKey(EVP_PKEY* key, std::string_view passphrase);
 
 /// Overwrites the text, also where a copy of it was short enough to be in the object itself.
 void wipe(std::string& text);

@@ -19,6 +19,7 @@
 #include "lumora-local/failure.h"
 #include "lumora-local/history.h"
 #include "lumora-local/key_file.h"
+#include "lumora-local/key_verbs.h"
 #include "lumora-local/migration.h"
 #include "lumora-local/pinwell_artefact_hasher.h"
 #include "lumora-local/rfc3339.h"
@@ -27,6 +28,7 @@
 #include "lumora-local/service_directory.h"
 #include "lumora-local/service_place.h"
 #include "lumora-local/store_opening.h"
+#include "lumora-local/terminal.h"
 #include "sandbox/sandbox.h"
 #include "src/confinement.h"
 
@@ -40,6 +42,10 @@ struct Arguments {
     std::string directory;
     std::vector<std::string> hosts;
     std::uint16_t port = kDefaultPort;
+    std::string passphraseFile;
+    std::string rootDirectory;
+    std::string signerRequest;
+    KeyVerbs keys;
     std::vector<std::string> subjects;
     std::vector<std::string> recordNames;
     std::string label;
@@ -60,32 +66,12 @@ struct Arguments {
     bool updatePlatform = false;
 };
 
-/// One whole line in one write, so that the lines of several threads do not mix.
-void writeLine(std::FILE* stream, std::string_view line) {
-    const std::string text = std::string(line) + "\n";
-    std::fwrite(text.data(), 1, text.size(), stream);
-    std::fflush(stream);
-}
-
-void writeText(const std::string& text) {
-    const bool written = std::fwrite(text.data(), 1, text.size(), stdout) == text.size();
-    if (!written || std::fflush(stdout) != 0) throw Failure(EX_IOERR, "cannot write to standard output");
-}
-
-/// Part of a longer text; its last part is flushed when the program ends well.
-void writePart(std::string_view text) {
-    if (std::fwrite(text.data(), 1, text.size(), stdout) != text.size()) {
-        throw Failure(EX_IOERR, "cannot write to standard output");
-    }
-}
-
-void complain(std::string_view text) {
-    writeLine(stderr, "lumora-local: " + std::string(text));
-}
-
 void runInit(const Arguments& arguments) {
     NewService service;
     service.port = arguments.port;
+    service.passphraseFile = arguments.passphraseFile;
+    service.rootDirectory = arguments.rootDirectory;
+    service.signerRequest = arguments.signerRequest;
     for (const std::string& host : arguments.hosts) {
         const std::optional<std::string> canonical = canonicalHost(host);
         if (!canonical || isWildcard(*canonical)) {
@@ -100,6 +86,15 @@ void runInit(const Arguments& arguments) {
         "Start it:         lumora-local serve %@\n"
         "Point pinwell at: PINWELL_PLATFORM=%@\n",
         toString(directory.advertisedEndpoint()), directoryPath, directory.platformPath()));
+    if (!service.rootDirectory.empty()) {
+        writeText(foundation::format("The root's key:   %@/root.key (keep it where no service runs)\n",
+                                     service.rootDirectory));
+    }
+    if (!service.signerRequest.empty()) {
+        writeText(
+            foundation::format("Signer's request: %@; once it is certified: lumora-local certify %@ CHAIN\n",
+                               service.signerRequest, directoryPath));
+    }
 }
 
 ServiceDirectory openService(const Arguments& arguments) {
@@ -125,7 +120,7 @@ template <class Command>
 void withRegistry(const Arguments& arguments, Command&& command) {
     const auto directory = openService(arguments);
     requireChangesAllowed(directory);
-    const TicketSigner signer(directory.signerKeyPath(), directory.signerChainPaths());
+    const TicketSigner signer = directory.openSigner();
     const std::unique_ptr<RecordStore> store = openStore(directory);
     const std::unique_ptr<ArtefactHasher> hasher = makePinwellArtefactHasher();
     const Registry registry{*store, signer, *hasher, parseEnvironment(arguments.environment).value(),
@@ -324,6 +319,12 @@ void declareCommands(CLI::App& app, Arguments& arguments) {
     init->add_option("--port", arguments.port, "The port clients are sent to")
         ->check(CLI::Range(1, 65535))
         ->capture_default_str();
+    init->add_option("--passphrase-file", arguments.passphraseFile,
+                     "Encrypt the keys with the first line of this file, or credential:NAME");
+    init->add_option("--root-out", arguments.rootDirectory,
+                     "A directory to make for the root's key, which is then not in the service");
+    init->add_option("--signer-csr", arguments.signerRequest,
+                     "A file to make: a request, for a signer that another authority certifies");
 
     declareIssue(*add("issue", "Issue a ticket for each artefact", kServiceHelp, runIssue), arguments);
     declareRevoke(*add("revoke", "Replace issued tickets by revoked ones", kServiceHelp, runRevoke),
@@ -348,6 +349,7 @@ void declareCommands(CLI::App& app, Arguments& arguments) {
     serve->add_option("--ready-file", arguments.readyFile, "Gets the service's URL once it listens");
     serve->add_flag("--update-platform", arguments.updatePlatform,
                     "Let platform.json name this very service");
+    declareKeyVerbs(app, arguments.keys);
     app.require_subcommand(1);
 }
 
@@ -359,7 +361,7 @@ int run(int argc, char** argv) {
     declareCommands(app, arguments);
     try {
         app.parse(argc, argv);
-        return EX_OK;
+        return arguments.keys.exitStatus;
     } catch (const CLI::Success& request) {
         return app.exit(request);  // help, version
     } catch (const CLI::ParseError& error) {

@@ -12,6 +12,7 @@
 #include "foundation/format.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
+#include "lumora-local/passphrase.h"
 #include "lumora-local/server.h"
 #include "lumora-local/store_opening.h"
 #include "sandbox/sandbox.h"
@@ -62,9 +63,15 @@ void takeSignals(int descriptor) {
     while (::read(descriptor, &information, sizeof information) == sizeof information) continue;
 }
 
-void reload(TlsContext& tls, const ServeOutput& output) {
+TlsFiles tlsFilesOf(const ServiceDirectory& directory) {
+    return {directory.serverCertificatePath(), directory.serverKeyPath(),
+            directory.settings().passphraseFile};
+}
+
+/// From the files that service.json names now, which may be others than before.
+void reload(const std::string& path, TlsContext& tls, const ServeOutput& output) {
     try {
-        tls.reload();
+        tls.reload(tlsFilesOf(ServiceDirectory::open(path)));
         output.out("read the certificate and the key again");
     } catch (const Failure& failure) {
         output.err(format("%s; the service goes on with the certificate that it has", failure.what()));
@@ -90,9 +97,12 @@ void giveUpRights(const ServiceDirectory& directory, const ServeOutput& output) 
     sandbox::Confinement rights;
     rights.files = sandbox::libraryFiles();
     rights.files.push_back({directory.path(), sandbox::Access::write});
-    for (const std::string& path : {directory.serverCertificatePath(), directory.serverKeyPath()})
+    const TlsFiles tls = tlsFilesOf(directory);
+    for (const std::string& path : {tls.certificate, tls.key})
         sandbox::append(rights.files, sandbox::fileAndItsLinks(path));
     addStoreRights(rights, directory);
+    if (!tls.passphraseFile.empty())
+        sandbox::append(rights.files, sandbox::fileAndItsLinks(pathOfPassphrase(tls.passphraseFile)));
     for (const std::string& missing : sandbox::confine(rights)) output.err(missing);
 }
 
@@ -106,7 +116,7 @@ void serve(const ServiceDirectory& directory, const ServeOptions& options, const
            const ServeSignals& signals) {
     // A file that an earlier run left would tell of a service that is not there yet.
     if (options.readyFile) ::unlink(options.readyFile->c_str());
-    TlsContext tls(directory.serverCertificatePath(), directory.serverKeyPath());
+    TlsContext tls(tlsFilesOf(directory));
     const std::unique_ptr<RecordStore> store = openStore(directory);
     Listener listener(options.listen ? *options.listen : directory.advertisedEndpoint());
     const Endpoint endpoint = reachable(directory, listener.endpoint());
@@ -118,9 +128,9 @@ void serve(const ServiceDirectory& directory, const ServeOptions& options, const
     giveUpRights(directory, output);
     Server server(lookups, tls, output.out, output.err, limits);
     const int hangUp = signals.reload.get();
-    server.run(listener, signals.stop.get(), {{hangUp, [&tls, &output, hangUp] {
+    server.run(listener, signals.stop.get(), {{hangUp, [&directory, &tls, &output, hangUp] {
                                                    takeSignals(hangUp);
-                                                   reload(tls, output);
+                                                   reload(directory.path(), tls, output);
                                                }}});
     output.out("stopped");
 }

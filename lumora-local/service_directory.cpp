@@ -1,6 +1,10 @@
 #include "lumora-local/service_directory.h"
 
+#include <fcntl.h>
+#include <sys/file.h>
+
 #include <filesystem>
+#include <optional>
 #include <system_error>
 
 #include "foundation/bytes.h"
@@ -12,6 +16,7 @@
 #include "lumora-local/authority.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
+#include "lumora-local/passphrase.h"
 #include "lumora-local/sqlite_store.h"
 
 namespace pinwell::lumora {
@@ -31,8 +36,10 @@ constexpr mode_t kPrivateFileMode = 0600;
 constexpr std::size_t kMaximumDescriptionSize = 1024 * 1024;
 
 constexpr std::string_view kHostsKey = "hosts";
-constexpr std::string_view kStoreKey = "store";
-constexpr std::string_view kRoleKey = "role";
+constexpr std::string_view kPassphraseFileKey = "passphraseFile";
+constexpr std::string_view kSignerKey = "signer";
+constexpr std::string_view kRequestedKey = "requested";
+constexpr const char* kFirstSignerKey = "ticket-signer.key";
 constexpr std::string_view kLumoraKey = "lumora";
 constexpr std::string_view kHostKey = "host";
 
@@ -55,27 +62,6 @@ Value platformDescription(const Endpoint& endpoint) {
     return Dictionary{{std::string(kLumoraKey), Dictionary{{std::string(kHostKey), toString(endpoint)}}}};
 }
 
-/// `nullopt` if the description has none.
-std::optional<std::string> storeUrlIn(const Value& value, const std::string& description) {
-    if (value.dictionary() == nullptr || !value.dictionary()->contains(std::string(kStoreKey)))
-        return std::nullopt;
-    const std::string* url = value[kStoreKey].string();
-    const std::string place = description + ": \"store\"";
-    requireStoreUrl(url != nullptr ? *url : "", place);
-    return *url;
-}
-
-Role roleIn(const Value& value, const std::string& description) {
-    if (value.dictionary() == nullptr || !value.dictionary()->contains(std::string(kRoleKey)))
-        return Role::full;
-    const std::string* role = value[kRoleKey].string();
-    if (role == nullptr || *role != "lookup") {
-        throw Failure(EX_CONFIG, format("%@: \"role\" is %@; it can be \"lookup\" or absent", description,
-                                        value[kRoleKey]));
-    }
-    return Role::lookup;
-}
-
 /// A name beside `path` that nothing has.
 std::string freeNameBeside(const std::string& path) {
     const std::string first = path + ".before-migration";
@@ -88,8 +74,12 @@ std::string freeNameBeside(const std::string& path) {
     return name;
 }
 
-void writeIdentity(const std::string& directory, const std::string& name, const Identity& identity) {
+void writeCertificate(const std::string& directory, const std::string& name, const Identity& identity) {
     writeNewFile(directory + "/" + name + ".pem", foundation::asBytes(identity.certificate), kPublicFileMode);
+}
+
+void writeIdentity(const std::string& directory, const std::string& name, const Identity& identity) {
+    writeCertificate(directory, name, identity);
     writeNewFile(directory + "/" + name + ".key", foundation::asBytes(identity.privateKey), kPrivateFileMode);
 }
 
@@ -103,40 +93,100 @@ void buildPlatform(const std::string& directory, const Authority& authority, con
     flushDirectory(directory);
 }
 
-void buildService(const std::string& directory, const Authority& authority,
-                  const std::vector<std::string>& hosts) {
+/// The file may be read from other places than this one.
+std::string absolutePlace(const std::string& place) {
+    return place.empty() || isCredential(place) ? place : std::filesystem::absolute(place).string();
+}
+
+Dictionary describeService(const NewService& service, const std::vector<std::string>& hosts) {
+    Dictionary description{{std::string(kHostsKey), Value(Array(hosts.begin(), hosts.end()))}};
+    if (!service.passphraseFile.empty()) {
+        description[std::string(kPassphraseFileKey)] = absolutePlace(service.passphraseFile);
+    }
+    if (!service.signerRequest.empty()) {
+        description[std::string(kSignerKey)] = Dictionary{{std::string(kRequestedKey), kFirstSignerKey}};
+    }
+    return description;
+}
+
+void buildService(const std::string& directory, const Authority& authority, const NewService& service,
+                  const Value& description) {
     makeDirectory(directory, kPrivateDirectoryMode);
-    writeIdentity(directory, "root", authority.root);
-    writeIdentity(directory, "ticket-intermediate", authority.ticketIntermediate);
-    writeIdentity(directory, "ticket-signer", authority.ticketSigner);
+    if (service.rootDirectory.empty()) {
+        writeIdentity(directory, "root", authority.root);
+    } else {
+        writeCertificate(directory, "root", authority.root);
+    }
+    if (service.signerRequest.empty()) {
+        writeIdentity(directory, "ticket-intermediate", authority.ticketIntermediate);
+        writeIdentity(directory, "ticket-signer", authority.ticketSigner);
+    }
     writeIdentity(directory, "server", authority.server);
-    const Value description = Dictionary{{std::string(kHostsKey), Value(Array(hosts.begin(), hosts.end()))}};
     writeNewFile(directory + "/service.json", jsonDocument(description), kPublicFileMode);
     SqliteStore::create(directory + "/records.sqlite");
     flushDirectory(directory);
 }
 
-}  // namespace
-
-void requireStoreUrl(const std::string& url, const std::string& place) {
-    const bool known = url.starts_with("postgresql://") || url.starts_with("postgres://");
-    // The text is not repeated: it may hold a password.
-    if (!known || url.find('\0') != std::string::npos) {
-        throw Failure(EX_CONFIG, format("%@ is not a URL that begins with postgresql://", place));
+/// What init makes beside the service's directory. Removed again if the service cannot be made.
+class Surroundings {
+  public:
+    Surroundings(const NewService& service, const Authority& authority) : service_(service) {
+        if (service_.rootDirectory.empty()) return;
+        root_.emplace(service_.rootDirectory, kPrivateDirectoryMode);
+        writeIdentity(root_->path(), "root", authority.root);
+        flushDirectory(root_->path());
     }
-}
+
+    /// Writes the signer's request, whose key goes into `directory`, and puts all in its place.
+    void publish(const std::string& directory, std::string_view passphrase) {
+        if (!service_.signerRequest.empty()) {
+            const Identity signer = requestSigner(passphrase);
+            writeNewFile(directory + "/service/" + kFirstSignerKey, foundation::asBytes(signer.privateKey),
+                         kPrivateFileMode);
+            writeNewFile(service_.signerRequest, foundation::asBytes(signer.certificate), kPublicFileMode);
+            requestWritten_ = true;
+        }
+        if (root_) root_->publish();
+        rootPublished_ = root_.has_value();
+    }
+
+    void keep() noexcept { kept_ = true; }
+
+    ~Surroundings() {
+        std::error_code ignored;
+        if (!kept_ && requestWritten_) std::filesystem::remove(service_.signerRequest, ignored);
+        if (!kept_ && rootPublished_) std::filesystem::remove_all(service_.rootDirectory, ignored);
+    }
+    Surroundings(const Surroundings&) = delete;
+    Surroundings& operator=(const Surroundings&) = delete;
+
+  private:
+    const NewService& service_;
+    std::optional<PendingDirectory> root_;
+    bool requestWritten_ = false;
+    bool rootPublished_ = false;
+    bool kept_ = false;
+};
+
+}  // namespace
 
 ServiceDirectory ServiceDirectory::create(const std::string& path, const NewService& service,
                                           foundation::Date now) {
     std::vector<std::string> hosts = service.hosts;
     if (hosts.empty()) hosts = {"localhost", "127.0.0.1", "::1"};
+    Passphrase passphrase;
+    if (!service.passphraseFile.empty()) passphrase.read(service.passphraseFile);
     PendingDirectory pending(path, kPublicDirectoryMode);
-    const Authority authority = createAuthority(hosts, now);
+    const Authority authority = createAuthority(hosts, now, passphrase.text());
     buildPlatform(pending.path() + "/platform", authority, {hosts.front(), service.port});
-    buildService(pending.path() + "/service", authority, hosts);
+    buildService(pending.path() + "/service", authority, service, Value(describeService(service, hosts)));
+    Surroundings surroundings(service, authority);
+    surroundings.publish(pending.path(), passphrase.text());
+    flushDirectory(pending.path() + "/service");
     flushDirectory(pending.path());
     pending.publish();
-    return {path, std::move(hosts)};
+    surroundings.keep();
+    return open(path);
 }
 
 ServiceDirectory ServiceDirectory::open(const std::string& path) {
@@ -146,35 +196,38 @@ ServiceDirectory ServiceDirectory::open(const std::string& path) {
         throw Failure(EX_NOINPUT, format("%@ holds no record service that can be read: %@", path,
                                          bytes.error().localizedDescription()));
     }
-    const Value value = readJson(description);
-    const Dictionary* object = value.dictionary();
-    const Array* listed = object != nullptr ? value[kHostsKey].array() : nullptr;
-    std::vector<std::string> hosts;
-    if (listed != nullptr) {
-        for (const Value& host : *listed) {
-            if (host.string() == nullptr || canonicalHost(*host.string()) != *host.string()) {
-                throw Failure(EX_CONFIG, format("%@: \"%@\" is not a host", description, host));
-            }
-            hosts.push_back(*host.string());
-        }
+    return {path, parseServiceSettings(readJson(description), description)};
+}
+
+TicketSigner ServiceDirectory::openSigner() const {
+    const SignerSettings& signer = settings_.signer;
+    if (signer.chain.empty()) {
+        throw Failure(EX_CONFIG, format("the signer has no certificate yet; once it is there: "
+                                        "lumora-local certify %@ CHAIN",
+                                        path_));
     }
-    if (hosts.empty()) throw Failure(EX_CONFIG, format("%@ names no hosts", description));
-    ServiceDirectory directory(path, std::move(hosts));
-    directory.storeUrl_ = storeUrlIn(value, description);
-    directory.role_ = roleIn(value, description);
-    return directory;
+    return {openSigningKey(signer.key, settings_.passphraseFile), signer.chain};
+}
+
+void ServiceDirectory::changeSettings(const std::function<void(Dictionary&)>& change) const {
+    const std::string folder = path_ + "/service";
+    const foundation::FileDescriptor lock(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (!lock || ::flock(lock.get(), LOCK_EX) != 0) {
+        throw Failure(EX_NOPERM, format("cannot lock %@", folder));
+    }
+    const Value old = readJson(descriptionPath());
+    Dictionary description = old.dictionary() != nullptr ? *old.dictionary() : Dictionary{};
+    change(description);
+    const Value changed(std::move(description));
+    static_cast<void>(parseServiceSettings(changed, descriptionPath()));
+    // The directory keeps others out. A service of another account reads the file.
+    replaceFile(descriptionPath(), jsonDocument(changed), kPublicFileMode);
 }
 
 std::string ServiceDirectory::moveStore(const std::string& url) const {
-    const std::string path = descriptionPath();
-    const Value old = readJson(path);
-    if (old.dictionary() == nullptr) throw Failure(EX_CONFIG, format("%@ is damaged", path));
-    const std::string kept = freeNameBeside(path);
-    writeNewFile(kept, jsonDocument(old), kPublicFileMode);
-    Dictionary description = *old.dictionary();
-    description[std::string(kStoreKey)] = url;
-    // The directory keeps others out. A service of another account reads the file.
-    replaceFile(path, jsonDocument(Value(std::move(description))), kPublicFileMode);
+    const std::string kept = freeNameBeside(descriptionPath());
+    writeNewFile(kept, jsonDocument(readJson(descriptionPath())), kPublicFileMode);
+    changeSettings([&](Dictionary& settings) { settings["store"] = url; });
     return kept;
 }
 

@@ -3,37 +3,36 @@
 //   DIR/platform/platform.json   {"lumora": {"host": "HOST:PORT"}}
 //   DIR/platform/roots/          the service's root certificate: with the line above, all that a client needs
 //   DIR/service/                 mode 0700
-//       service.json             {"hosts": [...]}, the names the server's certificate speaks for;
-//                                "store": "postgresql://...", if the records are not in records.sqlite;
-//                                "role": "lookup", for a service that changes no records
+//       service.json             what the owner decides (service_settings.h)
 //       root.pem  ticket-intermediate.pem  ticket-signer.pem  server.pem
 //       root.key  ticket-intermediate.key  ticket-signer.key  server.key      mode 0600
+//                                root.key may be elsewhere; service.json may name others in the place of
+//                                ticket-signer.* and server.*
 //       records.sqlite           the records (and the files that SQLite keeps beside it)
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <optional>
 #include <string>
 #include <vector>
 
 #include "foundation/date.h"
+#include "foundation/value_fwd.h"
 #include "lumora-local/endpoint.h"
+#include "lumora-local/service_settings.h"
+#include "lumora-local/ticket_maker.h"
 
 namespace pinwell::lumora {
 
 struct NewService {
     std::vector<std::string> hosts;     // canonical; empty: the three names of this machine's loopback
     std::uint16_t port = kDefaultPort;  // where clients will look for it, on the first host
+    std::string passphraseFile{};       // passphrase.h; empty: keys are kept in the clear
+    std::string rootDirectory{};  // made for root.pem and root.key; empty: root.key stays in the service
+    std::string signerRequest{};  // made: a request (RFC 2986) for the signer's certificate; empty: the
+                                  // service's own authority certifies the signer
 };
-
-enum class Role {
-    full,    ///< issues, revokes and answers lookups
-    lookup,  ///< answers lookups
-};
-
-/// Throws Failure (EX_CONFIG) if `url` is not one of a database that can hold records. `place` is where it is
-/// from, for the message.
-void requireStoreUrl(const std::string& url, const std::string& place);
 
 /// An existing service's place. Immutable; may be used from any thread.
 class ServiceDirectory {
@@ -47,26 +46,35 @@ class ServiceDirectory {
     static ServiceDirectory open(const std::string& path);
 
     const std::string& path() const noexcept { return path_; }
-    std::string descriptionPath() const { return servicePath("service.json"); }
     std::string platformPath() const { return path_ + "/platform"; }
     std::string storePath() const { return servicePath("records.sqlite"); }
-    std::string serverCertificatePath() const { return servicePath("server.pem"); }
-    std::string serverKeyPath() const { return servicePath("server.key"); }
-    std::string signerKeyPath() const { return servicePath("ticket-signer.key"); }
+    std::string descriptionPath() const { return servicePath("service.json"); }
+    std::string rootCertificatePath() const { return servicePath("root.pem"); }
+    std::string servicePath(const std::string& name) const { return path_ + "/service/" + name; }
+
+    const ServiceSettings& settings() const noexcept { return settings_; }
+    const std::string& serverCertificatePath() const noexcept { return settings_.server.certificate; }
+    const std::string& serverKeyPath() const noexcept { return settings_.server.key; }
+    const std::string& signerKeyPath() const noexcept { return settings_.signer.key; }
 
     /// Of the ticket signer's chain, the signer first and the root last.
-    std::vector<std::string> signerChainPaths() const {
-        return {servicePath("ticket-signer.pem"), servicePath("ticket-intermediate.pem"),
-                servicePath("root.pem")};
-    }
+    const std::vector<std::string>& signerChainPaths() const noexcept { return settings_.signer.chain; }
 
     /// Canonical, as they stand in the server's certificate; never empty.
-    const std::vector<std::string>& hosts() const noexcept { return hosts_; }
+    const std::vector<std::string>& hosts() const noexcept { return settings_.hosts; }
+
+    /// Opens the key and the chain that service.json names now. Throws Failure: EX_CONFIG if they do not fit,
+    /// or the signer has no certificate yet.
+    TicketSigner openSigner() const;
+
+    /// Rewrites service.json in one step, as `change` edits it; one process at a time. The new document is
+    /// held to the rules before it replaces the old one. Throws Failure.
+    void changeSettings(const std::function<void(foundation::Dictionary&)>& change) const;
 
     /// URL of the database with the records; `nullopt` if they are in the file at storePath().
-    const std::optional<std::string>& storeUrl() const noexcept { return storeUrl_; }
+    const std::optional<std::string>& storeUrl() const noexcept { return settings_.storeUrl; }
 
-    Role role() const noexcept { return role_; }
+    Role role() const noexcept { return settings_.role; }
 
     /// Rewrites service.json in one step, so that the records are at `url`; the rest of its text stays as it
     /// is in meaning. The old file stays beside it. Returns the path of the old file. Throws Failure.
@@ -80,15 +88,11 @@ class ServiceDirectory {
     void advertise(const Endpoint& endpoint) const;
 
   private:
-    ServiceDirectory(std::string path, std::vector<std::string> hosts)
-        : path_(std::move(path)), hosts_(std::move(hosts)) {}
-
-    std::string servicePath(const std::string& name) const { return path_ + "/service/" + name; }
+    ServiceDirectory(std::string path, ServiceSettings settings)
+        : path_(std::move(path)), settings_(std::move(settings)) {}
 
     std::string path_;
-    std::vector<std::string> hosts_;
-    std::optional<std::string> storeUrl_;
-    Role role_ = Role::full;
+    ServiceSettings settings_;
 };
 
 }  // namespace pinwell::lumora

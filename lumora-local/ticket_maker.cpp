@@ -5,8 +5,7 @@
 #include <algorithm>
 
 #include "foundation/byte_writer.h"
-#include "foundation/file_io.h"
-#include "lumora-local/key_file.h"
+#include "lumora-local/certificate_file.h"
 #include "lumora-local/openssl_handles.h"
 
 namespace pinwell::lumora {
@@ -22,7 +21,6 @@ constexpr std::uint32_t kRevokedFlag = 1;
 constexpr std::size_t kPayloadHeaderSize = 24;
 constexpr std::uint16_t kShortHashLength = 20;
 constexpr std::uint16_t kLongHashLength = 48;
-constexpr std::size_t kMaximumPemSize = 64 * 1024;
 
 void requireEncodable(const CodeHash& hash, bool withAlgorithm) {
     const std::optional<std::size_t> length = hashLength(hash.algorithm);
@@ -36,22 +34,6 @@ void requireEncodable(const CodeHash& hash, bool withAlgorithm) {
     if (!withAlgorithm && *length != kShortHashLength) {
         throw Failure(EX_DATAERR, "a ticket over a hash of unknown digest type cannot list a 48-byte hash");
     }
-}
-
-BioHandle readPem(const std::string& path) {
-    const foundation::Result<Data> bytes = foundation::readSmallFile(path, kMaximumPemSize);
-    if (!bytes) throw Failure(EX_NOINPUT, bytes.error().localizedDescription());
-    const int size = static_cast<int>(bytes->size());
-    BioHandle pem(BIO_new(BIO_s_mem()));
-    require(pem != nullptr && BIO_write(pem.get(), bytes->data(), size) == size, "read a PEM file");
-    return pem;
-}
-
-CertificateHandle readCertificate(const std::string& path) {
-    const BioHandle pem = readPem(path);
-    CertificateHandle certificate(PEM_read_bio_X509(pem.get(), nullptr, nullptr, nullptr));
-    require(certificate != nullptr, "read the certificate in " + path);
-    return certificate;
 }
 
 void appendDer(Data& data, X509* certificate) {
@@ -74,16 +56,14 @@ Data derSequence(const Data& contents) {
     return sequence;
 }
 
-Data sign(EVP_PKEY* key, ByteView message) {
-    const DigestContextHandle context(EVP_MD_CTX_new());
-    Data signature(kSignatureFieldSize);
-    std::size_t length = signature.size();
-    require(
-        context != nullptr && EVP_DigestSignInit(context.get(), nullptr, EVP_sha256(), nullptr, key) == 1 &&
-            EVP_DigestSign(context.get(), octets(signature), &length, octets(message), message.size()) == 1,
-        "sign a ticket");
-    std::fill(signature.begin() + static_cast<std::ptrdiff_t>(length), signature.end(), std::byte{0});
-    return signature;
+/// Whether the certificate is for the key with this SubjectPublicKeyInfo.
+bool isFor(X509* certificate, ByteView publicKey) {
+    const unsigned char* der = octets(publicKey);
+    const KeyHandle key(d2i_PUBKEY(nullptr, &der, static_cast<long>(publicKey.size())));
+    EVP_PKEY* certified = X509_get0_pubkey(certificate);
+    const bool same = key != nullptr && certified != nullptr && EVP_PKEY_eq(key.get(), certified) == 1;
+    ERR_clear_error();
+    return same;
 }
 
 }  // namespace
@@ -117,19 +97,23 @@ Data encodeTicketPayload(const TicketContents& contents) {
     return std::move(payload).take();
 }
 
-TicketSigner::TicketSigner(const std::string& keyPath, const std::vector<std::string>& chainPaths) {
-    key_.reset(readKeyFile(keyPath).release(), EVP_PKEY_free);
-
+TicketSigner::TicketSigner(std::shared_ptr<const SigningKey> key, const std::vector<std::string>& chainPaths)
+    : key_(std::move(key)) {
     Data certificates;
     for (const std::string& path : chainPaths) {
-        const CertificateHandle certificate = readCertificate(path);
+        const CertificateHandle certificate = readCertificateFile(path);
         const bool isSigner = certificates.empty();
-        require(!isSigner || X509_check_private_key(certificate.get(), key_.get()) == 1,
-                "use the key in " + keyPath + " with the certificate in " + path);
+        if (isSigner && !isFor(certificate.get(), key_->publicKey())) {
+            throw Failure(EX_CONFIG,
+                          format("the signer's key is not the one of the certificate in %@", path));
+        }
         appendDer(certificates, certificate.get());
     }
     certificateBlock_ = derSequence(certificates);
 }
+
+TicketSigner::TicketSigner(const std::string& keyPath, const std::vector<std::string>& chainPaths)
+    : TicketSigner(openSigningKey(keyPath, {}), chainPaths) {}
 
 Data TicketSigner::makeTicket(const TicketContents& contents) const {
     const Data payload = encodeTicketPayload(contents);
@@ -141,8 +125,10 @@ Data TicketSigner::makeTicket(const TicketContents& contents) const {
         .le32(static_cast<std::uint32_t>(payload.size()))
         .bytes(certificateBlock_)
         .bytes(payload);
-    const Data signature = sign(key_.get(), container.data());
-    container.bytes(signature);
+    const Data signature = key_->sign(container.data());
+    if (signature.size() > kSignatureFieldSize)
+        throw Failure(EX_SOFTWARE, "a signature of impossible length");
+    container.bytes(signature).zeros(kSignatureFieldSize - signature.size());
     return std::move(container).take();
 }
 

@@ -30,8 +30,7 @@
 #include "foundation/bytes.h"
 #include "foundation/date.h"
 #include "lumora-local/code_hash.h"
-
-struct evp_pkey_st;
+#include "lumora-local/signing_key.h"
 
 namespace pinwell::lumora {
 
@@ -52,15 +51,18 @@ foundation::Data encodeTicketPayload(const TicketContents& contents);
 /// Signs with one key. Immutable after construction; may be used from any thread.
 class TicketSigner {
   public:
-    /// PEM files: the signer's key, and its chain with the signer first. Throws Failure when one cannot be
-    /// used or the key is not the first certificate's.
+    /// `chainPaths` are PEM files, the signer's own certificate first. Throws Failure (EX_CONFIG) if the key
+    /// is not the first certificate's.
+    TicketSigner(std::shared_ptr<const SigningKey> key, const std::vector<std::string>& chainPaths);
+
+    /// With the key in a PEM file. Throws Failure when one cannot be used.
     TicketSigner(const std::string& keyPath, const std::vector<std::string>& chainPaths);
 
     /// A complete container. Throws Failure as encodeTicketPayload does.
     foundation::Data makeTicket(const TicketContents& contents) const;
 
   private:
-    std::shared_ptr<evp_pkey_st> key_;
+    std::shared_ptr<const SigningKey> key_;
     foundation::Data certificateBlock_;
 };
 

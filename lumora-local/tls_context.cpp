@@ -19,29 +19,25 @@ void requireRegularFile(const std::string& path) {
         throw Failure(EX_CONFIG, foundation::format("%@ is no regular file", path));
 }
 
-std::shared_ptr<boost::asio::ssl::context> load(const std::string& certificatePath,
-                                                const std::string& keyPath) {
-    requireRegularFile(certificatePath);
-    requireRegularFile(keyPath);
+std::shared_ptr<boost::asio::ssl::context> load(const TlsFiles& files) {
+    requireRegularFile(files.certificate);
+    requireRegularFile(files.key);
     auto context = std::make_shared<boost::asio::ssl::context>(boost::asio::ssl::context::tls_server);
     SSL_CTX* native = context->native_handle();
     require(SSL_CTX_set_min_proto_version(native, TLS1_2_VERSION) == 1, "set up TLS");
     SSL_CTX_set_options(native, SSL_OP_NO_RENEGOTIATION | SSL_OP_NO_COMPRESSION);
     SSL_CTX_set_mode(native, SSL_MODE_RELEASE_BUFFERS);  // an idle connection keeps no record buffers
-    require(SSL_CTX_use_certificate_chain_file(native, certificatePath.c_str()) == 1,
-            "use the certificate in " + certificatePath);
-    const KeyHandle key = readKeyFile(keyPath);
-    require(SSL_CTX_use_PrivateKey(native, key.get()) == 1, "use the key in " + keyPath);
-    require(SSL_CTX_check_private_key(native) == 1, "use the key in " + keyPath);
+    require(SSL_CTX_use_certificate_chain_file(native, files.certificate.c_str()) == 1,
+            "use the certificate in " + files.certificate);
+    const KeyHandle key = readKeyFile(files.key, files.passphraseFile);
+    require(SSL_CTX_use_PrivateKey(native, key.get()) == 1, "use the key in " + files.key);
+    require(SSL_CTX_check_private_key(native) == 1, "use the key in " + files.key);
     return context;
 }
 
 }  // namespace
 
-TlsContext::TlsContext(std::string certificatePath, std::string keyPath)
-    : certificatePath_(std::move(certificatePath)),
-      keyPath_(std::move(keyPath)),
-      current_(load(certificatePath_, keyPath_)) {}
+TlsContext::TlsContext(TlsFiles files) : files_(std::move(files)), current_(load(files_)) {}
 
 TlsContext::~TlsContext() = default;
 
@@ -50,8 +46,8 @@ std::shared_ptr<boost::asio::ssl::context> TlsContext::current() const {
     return current_;
 }
 
-void TlsContext::reload() {
-    auto loaded = load(certificatePath_, keyPath_);
+void TlsContext::reload(const TlsFiles& files) {
+    auto loaded = load(files);
     const std::lock_guard lock(mutex_);
     current_ = std::move(loaded);
 }

@@ -11,22 +11,31 @@ class context;
 
 namespace pinwell::lumora {
 
+/// PEM files: the certificate chain with the server's certificate first, and its key, which the passphrase at
+/// `passphraseFile` (passphrase.h) opens if it is encrypted.
+struct TlsFiles {
+    std::string certificate;
+    std::string key;
+    std::string passphraseFile{};
+};
+
 /// TLS 1.2 or later, without renegotiation and compression. May be used from any thread.
 class TlsContext {
   public:
-    /// PEM files: the certificate chain with the server's certificate first, and its key. Throws Failure.
-    TlsContext(std::string certificatePath, std::string keyPath);
+    /// Throws Failure.
+    explicit TlsContext(TlsFiles files);
     ~TlsContext();
 
     /// What new connections use. Connections keep the one that they began with.
     std::shared_ptr<boost::asio::ssl::context> current() const;
 
-    /// Reads both files again. Throws Failure if they cannot be used; current() stays as it was then.
-    void reload();
+    /// Reads these files, or the same ones again. Throws Failure if they cannot be used; current() stays as
+    /// it was then.
+    void reload(const TlsFiles& files);
+    void reload() { reload(files_); }
 
   private:
-    std::string certificatePath_;
-    std::string keyPath_;
+    TlsFiles files_;
     mutable std::mutex mutex_;
     std::shared_ptr<boost::asio::ssl::context> current_;
 };

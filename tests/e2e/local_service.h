@@ -23,7 +23,7 @@ class LocalServiceTest : public EndToEndTest {
     /// Starts it on a free port and points the platform directory at it.
     void serveRecords();
 
-    const std::string serviceDirectory = directory / "service";
+    std::string serviceDirectory = directory / "service";
     std::vector<std::string> samples;  // paths: an application, a signed and an unsigned image, a package
     std::unique_ptr<RunningProcess> serving;
 };

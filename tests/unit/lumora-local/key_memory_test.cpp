@@ -139,7 +139,7 @@ TEST_F(KeyMemory, HoldsNothingOfTheServersKeyWhenItIsReplacedOrGone) {
     const ServiceDirectory service = ServiceDirectory::open(path);
     const KeyTraces traces(service.serverKeyPath());
     {
-        TlsContext tls(service.serverCertificatePath(), service.serverKeyPath());
+        TlsContext tls({service.serverCertificatePath(), service.serverKeyPath()});
         tls.reload();
         EXPECT_EQ(timesInMemory(traces.asText), 0U);
         EXPECT_GE(timesInMemory(traces.asLimbs) + timesInMemory(traces.asNumber), 1U);

@@ -109,7 +109,7 @@ TEST_F(MigrationTest, RefusesADatabaseThatHoldsSomethingElse) {
     PostgresCluster& cluster = PostgresCluster::shared();
     migrate(directory(), url);
     cluster.sql(url, "UPDATE lumora.record SET label = 'other' WHERE name = 'a'");
-    describe("\"x\":1");
+    describe(R"("server":{"key":"server.key","certificate":"server.pem"})");
     const ProcessResult refused = test::runLumora({"migrate", service_, "--to", url});
     EXPECT_EQ(refused.exitStatus, 73) << refused.errors;
     EXPECT_EQ(directory().storeUrl(), std::nullopt);
@@ -118,7 +118,7 @@ TEST_F(MigrationTest, RefusesADatabaseThatHoldsSomethingElse) {
 TEST_F(MigrationTest, CanBeRepeatedIfOnlyTheDescriptionIsMissing) {
     const std::string url = PostgresCluster::shared().makeDatabase();
     migrate(directory(), url);
-    describe("\"x\":1");
+    describe(R"("server":{"key":"server.key","certificate":"server.pem"})");
     EXPECT_EQ(migrate(directory(), url).records, 3U);
     EXPECT_EQ(directory().storeUrl(), url);
 }
@@ -189,7 +189,7 @@ TEST_F(MigrationTest, SaysInOneLineWhatDoesNotFit) {
         describe("\"role\":null");
         expectRefused(command, "service.json: \"role\"");
     }
-    describe("\"x\":1");
+    describe(R"("server":{"key":"server.key","certificate":"server.pem"})");
     expectRefused({"migrate", service_, "--to", "postgresql:///lumora?host=/nowhere/at/all"}, "--to: ");
     expectRefused({"migrate", service_, "--to", "mysql://db/lumora"}, "--to is not a URL");
 }

@@ -73,7 +73,7 @@ class LimitedServer {
     TemporaryDirectory temporary_;
     ServiceDirectory directory_ = ServiceDirectory::create(temporary_ / "service", {}, Date::now());
     SqliteStore store_{directory_.storePath()};
-    TlsContext tls_{directory_.serverCertificatePath(), directory_.serverKeyPath()};
+    TlsContext tls_{{directory_.serverCertificatePath(), directory_.serverKeyPath()}};
     Listener listener_{Endpoint{"127.0.0.1", 0}};
     FileDescriptor stop_{::eventfd(0, EFD_CLOEXEC)};
     std::mutex mutex_;

@@ -1,0 +1,23 @@
+// Certificates in PEM files. Includes OpenSSL's headers: for .cpp files of this folder.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "lumora-local/openssl_handles.h"
+
+namespace pinwell::lumora {
+
+/// The first certificate of a file. Throws Failure: EX_NOINPUT if it cannot be read, EX_CONFIG if there is
+/// none in it.
+CertificateHandle readCertificateFile(const std::string& path);
+
+/// All certificates of a file, at least one and at most `limit`. Throws Failure as above.
+std::vector<CertificateHandle> readCertificateFiles(const std::string& path, std::size_t limit);
+
+std::string encodeCertificate(X509* certificate);
+
+/// The subject's common name, for messages; the whole subject if it has none.
+std::string nameOf(X509* certificate);
+
+}  // namespace pinwell::lumora

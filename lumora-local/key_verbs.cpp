@@ -1,0 +1,95 @@
+#include "lumora-local/key_verbs.h"
+
+#include <CLI/CLI.hpp>
+
+#include "foundation/date.h"
+#include "foundation/format.h"
+#include "lumora-local/check_command.h"
+#include "lumora-local/failure.h"
+#include "lumora-local/key_rotation.h"
+#include "lumora-local/service_directory.h"
+#include "lumora-local/service_place.h"
+#include "lumora-local/terminal.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::Date;
+using foundation::format;
+
+ServiceDirectory openNamed(KeyVerbs& verbs) {
+    takeDirectory(verbs.directory, verbs.words);
+    return ServiceDirectory::open(requireDirectory(verbs.directory));
+}
+
+void print(const RotationReport& report) {
+    for (const std::string& line : report) writeText(line + "\n");
+}
+
+void runRotate(KeyVerbs& verbs) {
+    const ServiceDirectory directory = openNamed(verbs);
+    if (verbs.words.size() != 1 || (verbs.words[0] != "signer" && verbs.words[0] != "server")) {
+        throw Failure(EX_USAGE, "rotate needs one word, signer or server");
+    }
+    if (verbs.words[0] == "server") {
+        if (!verbs.key.empty() || !verbs.requestFile.empty()) {
+            throw Failure(EX_USAGE, "--key and --signer-csr go with rotate signer");
+        }
+        return print(rotateServer(directory, verbs.rootDirectory, Date::now()));
+    }
+    if (!verbs.rootDirectory.empty()) throw Failure(EX_USAGE, "--root goes with rotate server");
+    if (!verbs.key.empty() && !verbs.requestFile.empty()) {
+        throw Failure(EX_USAGE, "--signer-csr makes a key of its own and does not go with --key");
+    }
+    if (!verbs.key.empty() && !isTokenKey(verbs.key)) {
+        throw Failure(EX_USAGE, format("%@ is no pkcs11: URI", verbs.key));
+    }
+    print(rotateSigner(directory, {verbs.key, verbs.requestFile}, Date::now()));
+}
+
+void runCertify(KeyVerbs& verbs) {
+    const ServiceDirectory directory = openNamed(verbs);
+    if (verbs.words.size() != 1)
+        throw Failure(EX_USAGE, "certify needs one file with the chain of certificates");
+    print(certifySignerElsewhere(directory, verbs.words[0], verbs.key, Date::now()));
+}
+
+void runCheck(KeyVerbs& verbs) {
+    const auto warning = parseDuration(verbs.warning);
+    if (!warning) throw Failure(EX_USAGE, format("%@ is no length of time: 12h, 30d or 8w", verbs.warning));
+    const ServiceDirectory directory = ServiceDirectory::open(requireDirectory(verbs.directory));
+    const std::vector<Finding> findings = checkService(directory, Date::now(), *warning);
+    writeText(describeFindings(findings));
+    verbs.exitStatus = exitStatusOf(findings);
+}
+
+constexpr const char* kServiceHelpText = "The service (default: $LUMORA_DIR)";
+
+}  // namespace
+
+void declareKeyVerbs(CLI::App& app, KeyVerbs& verbs) {
+    CLI::App* rotate = app.add_subcommand("rotate", "Replace the key of the signer or the server");
+    rotate->add_option("DIR", verbs.directory, kServiceHelpText);
+    rotate->add_option("signer|server", verbs.words, "Whose key");
+    rotate->add_option("--key", verbs.key, "signer: a pkcs11: URI of the key to use");
+    rotate->add_option("--signer-csr", verbs.requestFile,
+                       "signer: a file to make, a request for a certificate from another authority");
+    rotate->add_option("--root", verbs.rootDirectory, "server: the directory that root.key is in");
+    rotate->callback([&verbs] { runRotate(verbs); });
+
+    CLI::App* certify =
+        app.add_subcommand("certify", "Bring in a signer's certificate from another authority");
+    certify->add_option("DIR", verbs.directory, kServiceHelpText);
+    certify->add_option("CHAIN", verbs.words,
+                        "A PEM file: the certificates of signer, intermediate and root");
+    certify->add_option("--key", verbs.key, "The key that was certified, a file or a pkcs11: URI");
+    certify->callback([&verbs] { runCertify(verbs); });
+
+    CLI::App* check = app.add_subcommand("check", "Look keys, certificates and records over");
+    check->add_option("DIR", verbs.directory, kServiceHelpText);
+    check->add_option("--warn", verbs.warning, "How long before its end a certificate is complained about")
+        ->capture_default_str();
+    check->callback([&verbs] { runCheck(verbs); });
+}
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,166 @@
+#include "lumora-local/signing_process.h"
+
+#include <sys/socket.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cstring>
+#include <exception>
+#include <mutex>
+#include <system_error>
+
+#include "foundation/file_io.h"
+#include "foundation/format.h"
+#include "lumora-local/failure.h"
+#include "lumora-local/sha256.h"
+#include "lumora-local/token_key.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::ByteView;
+using foundation::Data;
+using foundation::FileDescriptor;
+
+// A question is the digest to sign. An answer is one byte, an exit status, two bytes, the length of what
+// follows, lowest first, and that many bytes: a signature or the text of a failure. The child begins with an
+// answer, the public key.
+constexpr std::size_t kDigestSize = 32;
+constexpr std::size_t kAnswerHead = 3;
+constexpr std::size_t kMaximumAnswer = 4096;
+
+/// Returns false at the end of the stream, and if it fails.
+bool readFully(int descriptor, std::byte* room, std::size_t size) {
+    while (size > 0) {
+        const ssize_t count = ::read(descriptor, room, size);
+        if (count < 0 && errno == EINTR) continue;
+        if (count <= 0) return false;
+        room += count;
+        size -= static_cast<std::size_t>(count);
+    }
+    return true;
+}
+
+bool writeFully(int descriptor, ByteView bytes) {
+    while (!bytes.empty()) {
+        // A peer that has gone is an error here, whatever the process does about SIGPIPE.
+        const ssize_t count = ::send(descriptor, bytes.data(), bytes.size(), MSG_NOSIGNAL);
+        if (count < 0 && errno == EINTR) continue;
+        if (count <= 0) return false;
+        bytes = bytes.subspan(static_cast<std::size_t>(count));
+    }
+    return true;
+}
+
+bool sendAnswer(int descriptor, int status, ByteView bytes) {
+    bytes = bytes.first(std::min(bytes.size(), kMaximumAnswer));
+    Data answer{static_cast<std::byte>(status), static_cast<std::byte>(bytes.size() & 0xFFU),
+                static_cast<std::byte>(bytes.size() >> 8U)};
+    foundation::append(answer, bytes);
+    return writeFully(descriptor, answer);
+}
+
+template <class Work>
+bool answerWith(int descriptor, Work&& work) {
+    try {
+        return sendAnswer(descriptor, EX_OK, work());
+    } catch (const Failure& failure) {
+        return sendAnswer(descriptor, failure.exitStatus(), foundation::asBytes(failure.what()));
+    } catch (const std::exception& error) {
+        return sendAnswer(descriptor, EX_SOFTWARE, foundation::asBytes(error.what()));
+    }
+}
+
+/// All that the child does.
+void serveToken(int descriptor, const std::string& uri) {
+    std::unique_ptr<TokenKey> key;
+    const bool sent = answerWith(descriptor, [&] {
+        key = std::make_unique<TokenKey>(uri);
+        return key->publicKey();
+    });
+    std::array<std::byte, kDigestSize> digest{};
+    while (sent && key != nullptr && readFully(descriptor, digest.data(), digest.size())) {
+        if (!answerWith(descriptor, [&] { return key->signDigest(digest); })) return;
+    }
+}
+
+class KeyBehindProcess final : public SigningKey {
+  public:
+    explicit KeyBehindProcess(const std::string& uri) {
+        std::array<int, 2> ends{};
+        if (::socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends.data()) != 0) failStarting();
+        ours_ = FileDescriptor(ends[0]);
+        FileDescriptor theirs(ends[1]);
+        child_ = ::fork();
+        if (child_ < 0) failStarting();
+        if (child_ == 0) {
+            ours_.reset();
+            serveToken(theirs.get(), uri);
+            ::_exit(EX_OK);
+        }
+        theirs.reset();
+        try {
+            publicKey_ = receive();
+        } catch (const Failure&) {
+            end();
+            throw;
+        }
+    }
+
+    ~KeyBehindProcess() override { end(); }
+    KeyBehindProcess(const KeyBehindProcess&) = delete;
+    KeyBehindProcess& operator=(const KeyBehindProcess&) = delete;
+
+    Data publicKey() const override { return publicKey_; }
+
+    Data sign(ByteView message) const override {
+        const Data digest = sha256(message);
+        const std::lock_guard lock(mutex_);
+        if (!writeFully(ours_.get(), digest)) failTalking();
+        return receive();
+    }
+
+  private:
+    [[noreturn]] static void failStarting() {
+        throw Failure(EX_OSERR, foundation::format("cannot start the process that signs: %@",
+                                                   std::generic_category().message(errno)));
+    }
+    [[noreturn]] static void failTalking() {
+        throw Failure(EX_IOERR, "the process that speaks to the token has ended");
+    }
+
+    Data receive() const {
+        std::array<std::byte, kAnswerHead> head{};
+        if (!readFully(ours_.get(), head.data(), head.size())) failTalking();
+        const std::size_t size = std::to_integer<std::size_t>(head[1]) | std::to_integer<std::size_t>(head[2])
+                                                                             << 8U;
+        if (size > kMaximumAnswer) failTalking();
+        Data bytes(size);
+        if (!readFully(ours_.get(), bytes.data(), size)) failTalking();
+        const int status = std::to_integer<int>(head[0]);
+        if (status != EX_OK) throw Failure(status, foundation::toString(bytes));
+        return bytes;
+    }
+
+    /// The child ends when nothing can be asked any more.
+    void end() {
+        ours_.reset();
+        while (child_ > 0 && ::waitpid(child_, nullptr, 0) < 0 && errno == EINTR) continue;
+    }
+
+    mutable std::mutex mutex_;
+    FileDescriptor ours_;
+    pid_t child_ = -1;
+    Data publicKey_;
+};
+
+}  // namespace
+
+std::unique_ptr<SigningKey> startSigningProcess(const std::string& uri) {
+    return std::make_unique<KeyBehindProcess>(uri);
+}
+
+}  // namespace pinwell::lumora

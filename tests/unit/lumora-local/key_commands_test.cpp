@@ -1,0 +1,107 @@
+// The commands about keys, as a user types them.
+#include <gtest/gtest.h>
+
+#include <filesystem>
+
+#include "running_service.h"
+#include "support/environment.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using pinwell::test::readFile;
+using pinwell::test::TemporaryDirectory;
+using test::Outcome;
+using test::runProgram;
+
+class KeyCommands : public testing::Test {
+  protected:
+    void init(std::vector<std::string> options = {}) const {
+        options.insert(options.begin(), {"init", service_});
+        const Outcome made = runProgram(options);
+        ASSERT_EQ(made.exitStatus, 0) << made.err;
+    }
+
+    static void expectFailure(const Outcome& outcome, int exitStatus) {
+        EXPECT_EQ(outcome.exitStatus, exitStatus) << outcome.err;
+        EXPECT_EQ(outcome.out, "");
+        EXPECT_TRUE(outcome.err.starts_with("lumora-local: ")) << outcome.err;
+        EXPECT_EQ(outcome.err.find('\n'), outcome.err.size() - 1) << outcome.err;
+    }
+
+    const TemporaryDirectory directory_;
+    const std::string service_ = directory_ / "service";
+};
+
+TEST_F(KeyCommands, RefuseWhatTheyDoNotUnderstand) {
+    init();
+    for (const std::vector<std::string>& arguments :
+         {std::vector<std::string>{"rotate"},
+          {"rotate", service_},
+          {"rotate", service_, "root"},
+          {"rotate", service_, "signer", "server"},
+          {"rotate", service_, "signer", "--root", "a"},
+          {"rotate", service_, "signer", "--key", "file.key"},
+          {"rotate", service_, "signer", "--key", "pkcs11:a", "--signer-csr", "b"},
+          {"rotate", service_, "server", "--key", "pkcs11:object=a"},
+          {"certify", service_},
+          {"check", service_, "--warn", "soon"},
+          {"check", service_, "more"}}) {
+        expectFailure(runProgram(arguments), 64);
+    }
+    expectFailure(runProgram({"check", directory_ / "absent"}), 66);
+    expectFailure(runProgram({"rotate", directory_ / "absent", "signer"}), 66);
+    expectFailure(runProgram({"certify", service_, directory_ / "absent"}), 66);
+}
+
+TEST_F(KeyCommands, FindTheServiceInTheEnvironment) {
+    init();
+    const pinwell::test::ScopedVariable directory("LUMORA_DIR", service_);
+    for (const std::vector<std::string>& arguments : {std::vector<std::string>{"rotate", "signer"},
+                                                      {"rotate", "server"},
+                                                      {"check"},
+                                                      {"check", "--warn", "8w"}}) {
+        const Outcome outcome = runProgram(arguments);
+        EXPECT_EQ(outcome.exitStatus, 0) << outcome.out << outcome.err;
+        EXPECT_NE(outcome.out, "");
+    }
+}
+
+TEST_F(KeyCommands, SayWhatTheyFound) {
+    init();
+    const Outcome good = runProgram({"check", service_});
+    EXPECT_EQ(good.exitStatus, 0) << good.out;
+    EXPECT_EQ(good.out.find("wrong"), std::string::npos) << good.out;
+    EXPECT_NE(good.out.find("ok\tserver\tlocalhost is valid until 20"), std::string::npos) << good.out;
+    EXPECT_EQ(runProgram({"check", service_, "--warn", "1000w"}).exitStatus, 1);
+    std::filesystem::remove(service_ + "/service/server.key");
+    const Outcome bad = runProgram({"check", service_});
+    EXPECT_EQ(bad.exitStatus, 78) << bad.out;
+    EXPECT_NE(bad.out.find("wrong\tserver\t"), std::string::npos) << bad.out;
+}
+
+TEST_F(KeyCommands, PutTheRootAndTheRequestWhereTheyAreTold) {
+    init({"--root-out", directory_ / "safe", "--signer-csr", directory_ / "signer.csr"});
+    EXPECT_TRUE(std::filesystem::exists(directory_ / "safe/root.key"));
+    EXPECT_TRUE(readFile(directory_ / "signer.csr").starts_with("-----BEGIN CERTIFICATE REQUEST-----"));
+    const Outcome issued = runProgram({"issue", service_, "--record", "2/2/" + std::string(40, 'a')});
+    expectFailure(issued, 78);
+    EXPECT_NE(issued.err.find("certify"), std::string::npos) << issued.err;
+    expectFailure(runProgram({"rotate", service_, "server"}), 78);
+    EXPECT_EQ(runProgram({"rotate", service_, "server", "--root", directory_ / "safe"}).exitStatus, 0);
+}
+
+TEST_F(KeyCommands, AreNotTriedWithSettingsThatHoldAMistake) {
+    init();
+    pinwell::test::writeFile(service_ + "/service/service.json",
+                             R"({"hosts":["localhost"],"pasphraseFile":"x"})");
+    for (const char* command : {"check", "list", "serve"}) {
+        const Outcome outcome = runProgram({command, service_});
+        expectFailure(outcome, 78);
+        EXPECT_NE(outcome.err.find("service.json: unknown key \"pasphraseFile\""), std::string::npos)
+            << outcome.err;
+    }
+}
+
+}  // namespace
+}  // namespace pinwell::lumora
