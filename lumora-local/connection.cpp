@@ -121,6 +121,7 @@ void Connection::beginRequest() {
     phase_ = Phase::reading;
     context_.table.becomeBusy(identifier_);
     ++served_;
+    begun_ = std::chrono::steady_clock::now();
     received_ = 0;
     headSeen_ = timedOut_ = unread_ = false;
     closeAfterwards_ = served_ >= context_.limits.requestsPerConnection || context_.stopping;
@@ -177,9 +178,7 @@ std::optional<Answer> Connection::guarded(Work&& work) {
         return work();
     } catch (const std::exception& error) {
         context_.errorLog(format("cannot answer a request: %s", error.what()));
-        Answer answer = refusal(503, "SERVICE_UNAVAILABLE", "The records cannot be read at the moment");
-        answer.headers.emplace_back("Retry-After", "1");
-        return answer;
+        return refusalForNow("The records cannot be read at the moment");
     }
 }
 
@@ -211,6 +210,24 @@ void Connection::onBody() {
             false);
 }
 
+void Connection::log(const Answer& answer, std::size_t size, const std::string& identifier) const {
+    RequestEntry entry;
+    entry.time = foundation::Date::now();
+    entry.peer = peer_;
+    if (headSeen_) {
+        const HttpRequest& request = parser_->get();
+        entry.method = {request.method_string().data(), request.method_string().size()};
+        entry.target = {request.target().data(), request.target().size()};
+    }
+    entry.status = answer.status;
+    entry.size = size;
+    entry.identifier = identifier;
+    entry.records = &answer.records;
+    entry.duration =
+        std::chrono::duration_cast<std::chrono::microseconds>(std::chrono::steady_clock::now() - begun_);
+    context_.accessLog(describeRequest(entry, context_.logForm));
+}
+
 void Connection::respond(const Answer& answer, bool bodyLeftBehind) {
     phase_ = Phase::writing;
     limitTime(context_.limits.requestTime);
@@ -219,13 +236,11 @@ void Connection::respond(const Answer& answer, bool bodyLeftBehind) {
     const HttpRequest& request = parser_->get();
     const unsigned version = headSeen_ ? request.version() : 11;
     const std::string identifier = foundation::globallyUniqueString();
-    const RequestHead head = headSeen_ ? headOf(request) : RequestHead{};
     const bool withoutBody = request.method() == http::verb::head;
     const auto done = [self = shared_from_this()](ErrorCode error, std::size_t) { self->onWritten(error); };
 
     const std::size_t size = answer.asset ? answer.asset->size() : answer.body.size();
-    context_.accessLog(format("%@ %s \"%s %s\" %d %zu %s", foundation::Date::now(), peer_, head.method,
-                              head.target, answer.status, size, identifier));
+    log(answer, size, identifier);
     if (answer.asset && !withoutBody) {
         asset_ = answer.asset;
         // The library's own cast: a body of characters over the bytes that all downloads share.
@@ -294,9 +309,19 @@ void Connection::drain(std::size_t drained) {
 }
 
 void Connection::limitTime(milliseconds time) {
-    timer_.expires_after(time);
+    deadline_ = std::chrono::steady_clock::now() + time;
+    if (!timerIsSet_ || deadline_ < timer_.expiry()) setTimer();
+}
+
+void Connection::setTimer() {
+    timer_.expires_at(deadline_);
+    timerIsSet_ = true;
     timer_.async_wait([self = shared_from_this()](ErrorCode error) {
-        if (!error && self->timer_.expiry() <= asio::steady_timer::clock_type::now()) self->onTimeout();
+        // Cancelled, or set again before this ran.
+        if (error || self->timer_.expiry() > std::chrono::steady_clock::now()) return;
+        self->timerIsSet_ = false;
+        if (self->deadline_ <= std::chrono::steady_clock::now()) return self->onTimeout();
+        self->setTimer();
     });
 }
 

@@ -13,6 +13,7 @@
 #include <boost/beast/http/span_body.hpp>
 #include <boost/beast/http/string_body.hpp>
 #include <boost/beast/ssl/ssl_stream.hpp>
+#include <chrono>
 #include <memory>
 #include <optional>
 #include <string>
@@ -31,6 +32,7 @@ struct ConnectionContext {
     const Server::LogLine& accessLog;
     const Server::LogLine& errorLog;
     const ServerLimits& limits;
+    LogForm logForm;
     ConnectionTable& table;
     const std::atomic<bool>& stopping;
 };
@@ -66,6 +68,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
     void onBody();
     void refuseUnreadable(ErrorCode error);
     void respond(const Answer& answer, bool bodyLeftBehind);
+    void log(const Answer& answer, std::size_t size, const std::string& identifier) const;
     void onWritten(ErrorCode error);
     void close(bool unread);
     void drain(std::size_t drained);
@@ -73,8 +76,10 @@ class Connection : public std::enable_shared_from_this<Connection> {
     template <class Work>
     std::optional<Answer> guarded(Work&& work);
 
-    /// One timer for whatever is waited for; a later call replaces it.
+    /// One limit for whatever is waited for; a later call replaces it. The timer is set again only for an
+    /// earlier end: most limits are replaced long before.
     void limitTime(std::chrono::milliseconds time);
+    void setTimer();
     void onTimeout();
     void endIfSilent();
 
@@ -86,6 +91,8 @@ class Connection : public std::enable_shared_from_this<Connection> {
     std::shared_ptr<boost::asio::ssl::context> tls_;
     std::optional<Stream> stream_;  // from the first byte on
     boost::asio::steady_timer timer_;
+    std::chrono::steady_clock::time_point deadline_;
+    bool timerIsSet_ = false;
     std::string peer_;
     ConnectionTable::Identifier identifier_ = 0;
     Phase phase_ = Phase::silent;
@@ -95,9 +102,10 @@ class Connection : public std::enable_shared_from_this<Connection> {
     std::optional<Message> message_;
     std::shared_ptr<const foundation::Data> asset_;
     std::optional<Response> assetMessage_;
-    std::size_t received_ = 0;  // bytes of this request
-    std::size_t served_ = 0;    // requests of this connection
-    bool established_ = false;  // the handshake is done
+    std::chrono::steady_clock::time_point begun_;  // this request
+    std::size_t received_ = 0;                     // bytes of this request
+    std::size_t served_ = 0;                       // requests of this connection
+    bool established_ = false;                     // the handshake is done
     bool headSeen_ = false;
     bool timedOut_ = false;
     bool closeAfterwards_ = false;

@@ -21,6 +21,7 @@ constexpr std::string_view kDatabasePrefix = "/database/1/";
 constexpr std::string_view kLookupSuffix = "/public/records/lookup";
 constexpr std::string_view kAssetPrefix = "/assets/";
 constexpr std::string_view kHealthPath = "/healthz";
+constexpr std::string_view kReadyPath = "/readyz";
 constexpr std::string_view kFileNameToken = "${f}";
 constexpr std::size_t kAssetIdentifierLength = 64;  // SHA-256 in hexadecimal
 constexpr std::size_t kMaximumFileNameLength = 200;
@@ -130,12 +131,8 @@ Value foundRecord(const std::string& name, std::string field, const char* type, 
     return Dictionary{{"recordName", name}, {"recordType", "SignedTicket"}, {"fields", std::move(fields)}};
 }
 
-/// Bytes that a record takes in an answer, at most: its name six times as long when every character is
-/// escaped.
-std::size_t sizeInAnswer(const std::string& name, const std::optional<Delivery>& delivery) {
-    constexpr std::size_t kFrame = 512;
-    const std::size_t ticket = delivery && delivery->inlineTicket ? delivery->inlineTicket->size() : 0;
-    return kFrame + 6 * name.size() + (ticket + 2) / 3 * 4;
+Answer answerTooLarge() {
+    return refusal(413, "ANSWER_TOO_LARGE", "The answer would be too large; ask for fewer records at once");
 }
 
 }  // namespace
@@ -147,10 +144,17 @@ Answer refusal(int status, std::string_view code, std::string_view reason) {
     return answer;
 }
 
+Answer refusalForNow(std::string_view reason) {
+    Answer answer = refusal(503, "SERVICE_UNAVAILABLE", reason);
+    answer.headers.emplace_back("Retry-After", "1");
+    return answer;
+}
+
 std::optional<Answer> LookupService::answerHead(const RequestHead& head) const {
     const std::string_view path = pathOf(head.target);
     const bool reading = head.method == "GET" || head.method == "HEAD";
     if (path == kHealthPath) return reading ? answerHealth() : methodNotAllowed("GET");
+    if (path == kReadyPath) return reading ? answerReadiness() : methodNotAllowed("GET");
     if (path.starts_with(kAssetPrefix)) return reading ? answerAsset(path) : methodNotAllowed("GET");
     if (!environmentOfLookup(path)) return notFound();
     if (head.method != "POST") return methodNotAllowed("POST");
@@ -166,37 +170,71 @@ std::optional<Answer> LookupService::answerHead(const RequestHead& head) const {
 Answer LookupService::answerLookup(const RequestHead& head, std::string_view body) const {
     const std::optional<Environment> environment = environmentOfLookup(pathOf(head.target));
     if (!environment) return notFound();
+    const std::optional<std::uint64_t> state = source_.changeCounter();
+    Answer answer;
+    if (state) {
+        if (const auto known = answers_.find(*state, *environment, body)) {
+            answer.body = known->text;
+            answer.records = known->names;
+            return answer;
+        }
+    }
     LookupBody request = parseLookupBody(body);
     if (request.refused) return *std::move(request.refused);
-    // A name that comes again is looked up once. What the answer costs is known before it is put together.
-    std::unordered_map<std::string, std::optional<Delivery>> found;
-    std::size_t size = 0;
+    // A name that comes again is looked up once. Answers share what they repeat until they are put together.
+    std::unordered_map<std::string_view, Found> found;
+    constexpr std::string_view kBegin = "{\"records\":[";
+    constexpr std::string_view kEnd = "]}";
+    std::size_t size = kBegin.size() + kEnd.size();
+    bool isForAll = true;
     for (const std::string& name : request.names) {
         auto [entry, fresh] = found.try_emplace(name);
-        if (fresh) entry->second = source_.findTicket(*environment, name);
-        size += sizeInAnswer(name, entry->second);
-        if (size > kMaximumAnswerSize) {
-            return refusal(413, "ANSWER_TOO_LARGE",
-                           "The answer would be too large; ask for fewer records at once");
-        }
+        if (fresh) entry->second = findRecord(head, *environment, name, state);
+        isForAll = isForAll && entry->second.isForAll;
+        size += entry->second.record->text.size() + 1;
+        if (size > kMaximumAnswerSize) return answerTooLarge();
     }
-    Array records;
+    answer.body.reserve(size);
+    answer.body = kBegin;
+    std::string_view separator;
     for (const std::string& name : request.names) {
-        const std::optional<Delivery>& delivery = found.at(name);
-        if (delivery && delivery->inlineTicket) {
-            records.push_back(foundRecord(name, "signedTicket", "BYTES",
-                                          foundation::encodeBase64(*delivery->inlineTicket)));
-        } else if (delivery && delivery->asset) {
-            Dictionary asset{{"downloadURL", assetUrlTemplate(head, delivery->asset->identifier)},
-                             {"size", delivery->asset->size}};
-            records.push_back(foundRecord(name, "signedTicketAsset", "ASSET", std::move(asset)));
-        } else {
-            records.push_back(missingRecord(name));
-        }
+        answer.body += separator;
+        answer.body += found.at(name).record->text;
+        separator = ",";
     }
-    Answer answer;
-    answer.body = json(Dictionary{{"records", std::move(records)}});
+    answer.body += kEnd;
+    answer.records = std::move(request.names);
+    if (state && isForAll) {
+        answers_.insert(*state, *environment, body,
+                        std::make_shared<const KeptAnswer>(KeptAnswer{answer.body, answer.records}));
+    }
     return answer;
+}
+
+/// A record as it is in an answer. Kept is only what is the same for all who ask: an asset's URL has the name
+/// by which its client came, and anybody can ask for names that are not there.
+LookupService::Found LookupService::findRecord(const RequestHead& head, Environment environment,
+                                               const std::string& name,
+                                               std::optional<std::uint64_t> state) const {
+    if (state) {
+        if (auto known = records_.find(*state, environment, name)) return {std::move(known), true};
+    }
+    const auto share = [](const Value& record) {
+        return std::make_shared<const KeptAnswer>(KeptAnswer{json(record)});
+    };
+    const std::optional<Delivery> delivery = source_.findTicket(environment, name);
+    if (delivery && delivery->inlineTicket) {
+        auto record = share(
+            foundRecord(name, "signedTicket", "BYTES", foundation::encodeBase64(*delivery->inlineTicket)));
+        if (state) records_.insert(*state, environment, name, record);
+        return {std::move(record), true};
+    }
+    if (delivery && delivery->asset) {
+        Dictionary asset{{"downloadURL", assetUrlTemplate(head, delivery->asset->identifier)},
+                         {"size", delivery->asset->size}};
+        return {share(foundRecord(name, "signedTicketAsset", "ASSET", std::move(asset))), false};
+    }
+    return {share(missingRecord(name)), false};
 }
 
 Answer LookupService::answerAsset(std::string_view path) const {
@@ -229,6 +267,17 @@ Answer LookupService::answerHealth() const {
     const std::size_t records = source_.countRecords();
     Answer answer;
     answer.body = json(Dictionary{{"status", "ok"}, {"records", std::uint64_t{records}}});
+    return answer;
+}
+
+Answer LookupService::answerReadiness() const {
+    // Throws if the records cannot be read. No record has this name.
+    static_cast<void>(source_.findTicket(Environment::production, ""));
+    if (obstacle_) {
+        if (const std::optional<std::string> obstacle = obstacle_()) return refusalForNow(*obstacle);
+    }
+    Answer answer;
+    answer.body = json(Dictionary{{"status", "ready"}});
     return answer;
 }
 

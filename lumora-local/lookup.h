@@ -8,11 +8,13 @@
 //                                     "value": {"downloadURL": "https://.../${f}", "size": BYTES}}}}
 //        {"recordName": N, "serverErrorCode": "NOT_FOUND", "reason": "Record not found"}
 //   GET  /assets/IDENTIFIER/NAME    the ticket's bytes; NAME is the client's choice in the place of ${f}
-//   GET  /healthz                   {"status": "ok"}
+//   GET  /healthz                   {"status": "ok", "records": N}: the process answers, and the records are
+//   there GET  /readyz                    {"status": "ready"}, or 503 if lookups or changes would fail
 //
 // Every refusal is a JSON object {"serverErrorCode": C, "reason": R} with a 4xx or 5xx status.
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -23,6 +25,7 @@
 #include <vector>
 
 #include "foundation/bytes.h"
+#include "lumora-local/answer_cache.h"
 #include "lumora-local/endpoint.h"
 #include "lumora-local/record_store.h"
 
@@ -53,17 +56,29 @@ struct Answer {
     std::shared_ptr<const foundation::Data>
         asset;  // in the place of `body`; downloads of one ticket share it
     std::vector<std::pair<std::string, std::string>> headers;
+    std::vector<std::string> records;  // the names that were looked up, for the log
 };
 
 /// A refusal in the form that all refusals have.
 Answer refusal(int status, std::string_view code, std::string_view reason);
 
+/// A refusal that time may mend: 503, with Retry-After.
+Answer refusalForNow(std::string_view reason);
+
+/// Says why the service cannot do all of its work although the records can be read; `nullopt` if it can. From
+/// any thread.
+using Obstacle = std::function<std::optional<std::string>()>;
+
 class LookupService {
   public:
     /// `hosts` are the names that the server's certificate speaks for; `fallback` is where the service can be
     /// reached when a request does not say by which of them it came.
-    LookupService(RecordSource& source, std::vector<std::string> hosts, Endpoint fallback)
-        : source_(source), hosts_(std::move(hosts)), fallback_(std::move(fallback)) {}
+    LookupService(RecordSource& source, std::vector<std::string> hosts, Endpoint fallback,
+                  Obstacle obstacle = {})
+        : source_(source),
+          hosts_(std::move(hosts)),
+          fallback_(std::move(fallback)),
+          obstacle_(std::move(obstacle)) {}
 
     /// The answer as far as the head decides it; nothing when the body must be read and handed to
     /// answerLookup. From any thread.
@@ -73,14 +88,24 @@ class LookupService {
     Answer answerLookup(const RequestHead& head, std::string_view body) const;
 
   private:
+    struct Found {
+        std::shared_ptr<const KeptAnswer> record;
+        bool isForAll = false;  // whoever asks gets the same
+    };
+    Found findRecord(const RequestHead& head, Environment environment, const std::string& name,
+                     std::optional<std::uint64_t> state) const;
     Answer answerAsset(std::string_view path) const;
     std::shared_ptr<const foundation::Data> sharedAsset(const std::string& identifier) const;
     Answer answerHealth() const;
+    Answer answerReadiness() const;
     std::string assetUrlTemplate(const RequestHead& head, const std::string& identifier) const;
 
     RecordSource& source_;
     std::vector<std::string> hosts_;
     Endpoint fallback_;
+    Obstacle obstacle_;
+    mutable AnswerCache records_;
+    mutable AnswerCache answers_;  // by the bodies of their requests
     mutable std::mutex assetsMutex_;
     mutable std::unordered_map<std::string, std::weak_ptr<const foundation::Data>> assets_;  // being sent
 };

@@ -19,7 +19,7 @@
 #include "lumora-local/failure.h"
 #include "lumora-local/history.h"
 #include "lumora-local/key_file.h"
-#include "lumora-local/key_verbs.h"
+#include "lumora-local/upkeep_verbs.h"
 #include "lumora-local/migration.h"
 #include "lumora-local/pinwell_artefact_hasher.h"
 #include "lumora-local/rfc3339.h"
@@ -45,7 +45,7 @@ struct Arguments {
     std::string passphraseFile;
     std::string rootDirectory;
     std::string signerRequest;
-    KeyVerbs keys;
+    UpkeepVerbs upkeep;
     std::vector<std::string> subjects;
     std::vector<std::string> recordNames;
     std::string label;
@@ -349,7 +349,7 @@ void declareCommands(CLI::App& app, Arguments& arguments) {
     serve->add_option("--ready-file", arguments.readyFile, "Gets the service's URL once it listens");
     serve->add_flag("--update-platform", arguments.updatePlatform,
                     "Let platform.json name this very service");
-    declareKeyVerbs(app, arguments.keys);
+    declareUpkeepVerbs(app, arguments.upkeep);
     app.require_subcommand(1);
 }
 
@@ -361,7 +361,7 @@ int run(int argc, char** argv) {
     declareCommands(app, arguments);
     try {
         app.parse(argc, argv);
-        return arguments.keys.exitStatus;
+        return arguments.upkeep.exitStatus;
     } catch (const CLI::Success& request) {
         return app.exit(request);  // help, version
     } catch (const CLI::ParseError& error) {

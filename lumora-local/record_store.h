@@ -40,6 +40,11 @@ class RecordSource {
     virtual std::optional<foundation::Data> findAsset(const std::string& identifier) = 0;
 
     virtual std::size_t countRecords() = 0;
+
+    /// Grows with every change of a record, whoever makes it: what was read after a call is not older than
+    /// the state that the result stands for. A change that was acknowledged before the call is part of it.
+    /// `nullopt` if the source cannot tell, and then nothing that was read may be used again.
+    virtual std::optional<std::uint64_t> changeCounter() { return std::nullopt; }
 };
 
 /// One record with all that is known of it except the ticket.

@@ -4,6 +4,7 @@
 #include <signal.h>
 #include <sys/resource.h>
 #include <sys/signalfd.h>
+#include <sys/statvfs.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -14,6 +15,7 @@
 #include "lumora-local/file_writing.h"
 #include "lumora-local/passphrase.h"
 #include "lumora-local/server.h"
+#include "lumora-local/service_manager.h"
 #include "lumora-local/store_opening.h"
 #include "sandbox/sandbox.h"
 
@@ -27,6 +29,53 @@ using foundation::format;
 Endpoint reachable(const ServiceDirectory& directory, const Endpoint& bound) {
     return isWildcard(bound.host) ? Endpoint{directory.hosts().front(), bound.port} : bound;
 }
+
+/// Lines about the service in the form that service.json asks for. As JSON all of them go where requests go:
+/// standard error has the program's name before each line.
+ServeOutput inForm(LogForm form, const ServeOutput& output) {
+    if (form == LogForm::text) return output;
+    const auto as = [out = output.out](const char* level) {
+        return
+            [out, level](std::string_view line) { out(messageAsJson(foundation::Date::now(), level, line)); };
+    };
+    return {as("info"), as("error")};
+}
+
+/// Whoever issues or revokes needs room for it.
+Obstacle fullDiskAt(const std::string& path) {
+    return [path]() -> std::optional<std::string> {
+        constexpr std::uint64_t kLeast = std::uint64_t{1024} * 1024;
+        struct statvfs status {};
+        if (::statvfs(path.c_str(), &status) != 0) return "The service's directory cannot be reached";
+        if (std::uint64_t{status.f_bavail} * status.f_frsize >= kLeast) return std::nullopt;
+        return "There is no space left for records";
+    };
+}
+
+/// Announces readiness to the service manager, and gives the signs of life that it wants.
+class ManagedRun {
+  public:
+    explicit ManagedRun(const ServiceManager& manager) : manager_(manager) {
+        if (manager.signOfLife()) ticker_ = makeTicker(*manager.signOfLife());
+    }
+
+    void ready(const Endpoint& endpoint) const {
+        manager_.tell(format("READY=1\nSTATUS=Answers lookups at https://%@", toString(endpoint)));
+    }
+
+    /// From one of the threads that answer requests: when all of them are stuck, the sign does not come.
+    std::optional<Watch> watch() const {
+        if (!ticker_) return std::nullopt;
+        return Watch{ticker_.get(), [this] {
+                         std::uint64_t count = 0;
+                         if (::read(ticker_.get(), &count, sizeof count) > 0) manager_.tell("WATCHDOG=1");
+                     }};
+    }
+
+  private:
+    const ServiceManager& manager_;
+    foundation::FileDescriptor ticker_;
+};
 
 void announce(const ServiceDirectory& directory, const ServeOptions& options, const ServeOutput& output,
               const Endpoint& endpoint) {
@@ -112,8 +161,9 @@ ServeSignals catchServeSignals() {
     return {waitForSignals({SIGTERM, SIGINT}), waitForSignals({SIGHUP})};
 }
 
-void serve(const ServiceDirectory& directory, const ServeOptions& options, const ServeOutput& output,
+void serve(const ServiceDirectory& directory, const ServeOptions& options, const ServeOutput& lines,
            const ServeSignals& signals) {
+    const ServeOutput output = inForm(directory.settings().log, lines);
     // A file that an earlier run left would tell of a service that is not there yet.
     if (options.readyFile) ::unlink(options.readyFile->c_str());
     TlsContext tls(tlsFilesOf(directory));
@@ -122,16 +172,22 @@ void serve(const ServiceDirectory& directory, const ServeOptions& options, const
     const Endpoint endpoint = reachable(directory, listener.endpoint());
     announce(directory, options, output, endpoint);
 
-    const LookupService lookups(*store, directory.hosts(), endpoint);
+    const ServiceManager manager;
+    const ManagedRun run(manager);
+    const LookupService lookups(*store, directory.hosts(), endpoint, fullDiskAt(directory.servicePath("")));
     ServerLimits limits;
     limits.connections = connectionsThatFit();
     giveUpRights(directory, output);
-    Server server(lookups, tls, output.out, output.err, limits);
+    Server server(lookups, tls, lines.out, output.err, limits, directory.settings().log);
     const int hangUp = signals.reload.get();
-    server.run(listener, signals.stop.get(), {{hangUp, [&directory, &tls, &output, hangUp] {
-                                                   takeSignals(hangUp);
-                                                   reload(directory.path(), tls, output);
-                                               }}});
+    std::vector<Watch> watches{{hangUp, [&directory, &tls, &output, hangUp] {
+                                    takeSignals(hangUp);
+                                    reload(directory.path(), tls, output);
+                                }}};
+    if (const auto watch = run.watch()) watches.push_back(*watch);
+    run.ready(endpoint);
+    server.run(listener, signals.stop.get(), watches);
+    manager.tell("STOPPING=1");
     output.out("stopped");
 }
 

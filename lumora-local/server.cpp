@@ -156,18 +156,19 @@ void work(asio::io_context& context, const Server::LogLine& errorLog) {
 }  // namespace
 
 Server::Server(const LookupService& lookups, const TlsContext& context, LogLine accessLog, LogLine errorLog,
-               const ServerLimits& limits)
+               const ServerLimits& limits, LogForm form)
     : lookups_(lookups),
       context_(context),
       accessLog_(std::move(accessLog)),
       errorLog_(std::move(errorLog)),
-      limits_(limits) {}
+      limits_(limits),
+      form_(form) {}
 
 void Server::run(Listener& listener, int stopDescriptor, const std::vector<Watch>& watches) {
     const std::size_t workers = workersFor(limits_);
     ConnectionTable table(limits_.connectionsPerAddress);
     std::atomic<bool> stopping{false};
-    ConnectionContext shared{lookups_, context_, accessLog_, errorLog_, limits_, table, stopping};
+    ConnectionContext shared{lookups_, context_, accessLog_, errorLog_, limits_, form_, table, stopping};
     asio::io_context context(static_cast<int>(workers));
 
     Acceptor acceptor(context, listener, shared);

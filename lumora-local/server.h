@@ -6,6 +6,7 @@
 #include <string_view>
 #include <vector>
 
+#include "lumora-local/access_log.h"
 #include "lumora-local/listener.h"
 #include "lumora-local/lookup.h"
 #include "lumora-local/tls_context.h"
@@ -36,7 +37,7 @@ class Server {
     /// References must outlive the server. `accessLog` gets one line per request, `errorLog` one for each
     /// request that failed through our own fault; both come from any worker, several at a time.
     Server(const LookupService& lookups, const TlsContext& context, LogLine accessLog, LogLine errorLog,
-           const ServerLimits& limits = {});
+           const ServerLimits& limits = {}, LogForm form = LogForm::text);
 
     /// Serves until `stopDescriptor` is readable (which nobody may undo), then refuses new connections, lets
     /// the requests that have begun finish, closes the silent connections, and returns. Takes the listener's
@@ -49,6 +50,7 @@ class Server {
     LogLine accessLog_;
     LogLine errorLog_;
     ServerLimits limits_;
+    LogForm form_;
 };
 
 }  // namespace pinwell::lumora

@@ -162,7 +162,7 @@ bool isTokenKey(std::string_view key) {
 
 ServiceSettings parseServiceSettings(const Value& document, const std::string& path) {
     const SettingsObject settings(document, path, "");
-    settings.allowOnly({"hosts", "passphraseFile", "role", "server", "signer", "store"});
+    settings.allowOnly({"hosts", "log", "passphraseFile", "role", "server", "signer", "store"});
     const Folder folder(path);
     ServiceSettings result;
     result.hosts = readHosts(settings, path);
@@ -173,6 +173,9 @@ ServiceSettings parseServiceSettings(const Value& document, const std::string& p
         requireStoreUrl(url != nullptr ? *url : "", path + ": \"store\"");
         result.storeUrl = *url;
     }
+    const std::string log = settings.text("log");
+    if (!log.empty() && log != "text" && log != "json") settings.complain("log", "is neither text nor json");
+    if (log == "json") result.log = LogForm::json;
     result.role = readRole(settings, document["role"], path);
     result.signer = readSigner(settings, folder);
     result.server = readServer(settings, folder);

@@ -3,6 +3,7 @@
 //   "hosts"           the names that the server's certificate speaks for; required
 //   "passphraseFile"  a file whose first line opens encrypted key files, or "credential:NAME", the file NAME
 //                     in $CREDENTIALS_DIRECTORY
+//   "log"             "text", or "json": one object a line
 //   "store"           "postgresql://...", if the records are not in records.sqlite
 //   "role"            "lookup", for a service that changes no records
 //   "signer"          whose signature tickets bear: {"key": K, "chain": [SIGNER, INTERMEDIATE, ROOT]}. K is a
@@ -19,6 +20,7 @@
 #include <vector>
 
 #include "foundation/value.h"
+#include "lumora-local/access_log.h"
 
 namespace pinwell::lumora {
 
@@ -53,6 +55,7 @@ struct ServiceSettings {
     std::string passphraseFile;           // a path or "credential:NAME"; empty if there is none
     std::optional<std::string> storeUrl;  // of a database; `nullopt`: the records are in a file
     Role role = Role::full;
+    LogForm log = LogForm::text;
     SignerSettings signer;
     ServerSettings server;
 };

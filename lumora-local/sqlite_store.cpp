@@ -5,6 +5,7 @@
 
 #include <functional>
 #include <limits>
+#include <utility>
 
 #include "foundation/date.h"
 #include "foundation/format.h"
@@ -59,6 +60,18 @@ Data toData(const SQLite::Column& column) {
     const ByteView view(bytes, bytes == nullptr ? 0 : static_cast<std::size_t>(column.getBytes()));
     return foundation::toData(view);
 }
+
+/// Ends a statement that is kept: it holds its transaction open until then.
+class UnfinishedStatement {
+  public:
+    explicit UnfinishedStatement(SQLite::Statement& statement) : statement_(statement) {}
+    ~UnfinishedStatement() { statement_.tryReset(); }
+    UnfinishedStatement(const UnfinishedStatement&) = delete;
+    UnfinishedStatement& operator=(const UnfinishedStatement&) = delete;
+
+  private:
+    SQLite::Statement& statement_;
+};
 
 void bindBlob(SQLite::Statement& statement, int index, ByteView bytes) {
     if (bytes.size() > static_cast<std::size_t>(std::numeric_limits<int>::max())) {
@@ -176,6 +189,11 @@ SqliteStore::SqliteStore(const std::string& path, StoreGuard guard) : path_(path
             std::make_unique<SQLite::Database>(path, SQLite::OPEN_READWRITE, kBusyTimeoutMilliseconds);
         configureSqlite(*database_);
         upgradeSqliteSchema(*database_, path);
+        dataVersion_ = std::make_unique<SQLite::Statement>(*database_, "PRAGMA data_version");
+        findTicket_ = std::make_unique<SQLite::Statement>(
+            *database_,
+            "SELECT asset, length(ticket), CASE WHEN asset IS NULL THEN ticket END"
+            " FROM record WHERE environment = ? AND name = ?");
     });
 }
 
@@ -191,9 +209,8 @@ auto SqliteStore::reading(Work work) {
 std::optional<Delivery> SqliteStore::findTicket(Environment environment, const std::string& recordName) {
     return reading([&]() -> std::optional<Delivery> {
         // An asset's bytes are left where they are: the answer needs their number alone.
-        SQLite::Statement row(*database_,
-                              "SELECT asset, length(ticket), CASE WHEN asset IS NULL THEN ticket END"
-                              " FROM record WHERE environment = ? AND name = ?");
+        SQLite::Statement& row = *findTicket_;
+        const UnfinishedStatement unfinished(row);
         row.bind(1, environmentText(environment));
         row.bind(2, recordName);
         if (!row.executeStep()) return std::nullopt;
@@ -205,6 +222,16 @@ std::optional<Delivery> SqliteStore::findTicket(Environment environment, const s
                                              static_cast<std::uint64_t>(row.getColumn(1).getInt64())};
         }
         return delivery;
+    });
+}
+
+std::optional<std::uint64_t> SqliteStore::changeCounter() {
+    return reading([&]() -> std::optional<std::uint64_t> {
+        const UnfinishedStatement unfinished(*dataVersion_);
+        if (!dataVersion_->executeStep()) return std::nullopt;
+        const std::int64_t version = dataVersion_->getColumn(0).getInt64();
+        if (version != std::exchange(lastDataVersion_, version)) ++changes_;
+        return changes_;
     });
 }
 
@@ -245,6 +272,7 @@ void SqliteStore::put(Environment environment, const std::vector<SignedRecord>& 
             previous = event.hash;
         }
         transaction.commit();
+        ++changes_;
     });
 }
 

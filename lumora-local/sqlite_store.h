@@ -12,7 +12,8 @@
 
 namespace SQLite {
 class Database;
-}
+class Statement;
+}  // namespace SQLite
 
 namespace pinwell::lumora {
 
@@ -29,6 +30,9 @@ class SqliteStore final : public RecordStore {
     std::optional<Delivery> findTicket(Environment environment, const std::string& recordName) override;
     std::optional<foundation::Data> findAsset(const std::string& identifier) override;
     std::size_t countRecords() override;
+
+    /// From `PRAGMA data_version`, which tells of other connections, and a count of this one's own changes.
+    std::optional<std::uint64_t> changeCounter() override;
     void put(Environment environment, const std::vector<SignedRecord>& records,
              const Occasion& occasion) override;
     std::optional<Record> find(Environment environment, const std::string& recordName) override;
@@ -47,6 +51,11 @@ class SqliteStore final : public RecordStore {
     const StoreGuard guard_;
     std::mutex mutex_;  // a connection's statements are not to be mixed
     std::unique_ptr<SQLite::Database> database_;
+    // Prepared once: a lookup is shorter than the preparation of its statement.
+    std::unique_ptr<SQLite::Statement> dataVersion_;
+    std::unique_ptr<SQLite::Statement> findTicket_;
+    std::int64_t lastDataVersion_ = 0;
+    std::uint64_t changes_ = 0;
 };
 
 }  // namespace pinwell::lumora

@@ -22,11 +22,17 @@ using foundation::format;
 /// changed.
 class StoreWatch {
   public:
-    explicit StoreWatch(const ServiceDirectory& directory) : opened_(directory), seen_(signatureNow()) {}
+    explicit StoreWatch(const ServiceDirectory& directory)
+        : opened_(directory), seen_(signatureNow()), records_(recordsNow()) {}
 
     void check(StoreUse use) {
         if (use == StoreUse::changing) requireChangesAllowed(opened_);
         const std::lock_guard lock(mutex_);
+        // A file that is open outlives its name; what takes its place has other records.
+        if (!(recordsNow() == records_)) {
+            throw Failure(EX_TEMPFAIL, format("%@ is not the file that was opened; start again to use it",
+                                              opened_.storePath()));
+        }
         const Signature now = signatureNow();
         // Who changes records has to be certain: two changes within a clock tick look alike.
         if (use == StoreUse::changing || !(now == seen_)) moved_ = hasMoved(use);
@@ -53,6 +59,13 @@ class StoreWatch {
         return {status.st_dev, status.st_ino, status.st_mtim.tv_sec, status.st_mtim.tv_nsec};
     }
 
+    /// The file with the records alone, not its contents; nothing of it for a database.
+    Signature recordsNow() const {
+        struct stat status {};
+        if (opened_.storeUrl() || ::stat(opened_.storePath().c_str(), &status) != 0) return {};
+        return {status.st_dev, status.st_ino, 0, 0};
+    }
+
     bool hasMoved(StoreUse use) const {
         try {
             return ServiceDirectory::open(opened_.path()).storeUrl() != opened_.storeUrl();
@@ -66,6 +79,7 @@ class StoreWatch {
     const ServiceDirectory opened_;
     std::mutex mutex_;
     Signature seen_;
+    const Signature records_;
     bool moved_ = false;
 };
 

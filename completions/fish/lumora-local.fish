@@ -9,6 +9,8 @@ complete -c lumora-local -n __fish_use_subcommand -f -a migrate -d 'Move the rec
 complete -c lumora-local -n __fish_use_subcommand -f -a rotate -d 'Replace the key of the signer or the server'
 complete -c lumora-local -n __fish_use_subcommand -f -a certify -d 'Bring in a certificate of the signer'
 complete -c lumora-local -n __fish_use_subcommand -f -a check -d 'Look keys, certificates and records over'
+complete -c lumora-local -n __fish_use_subcommand -f -a backup -d 'Write the whole service into one file'
+complete -c lumora-local -n __fish_use_subcommand -f -a restore -d 'Make a service from such a file'
 complete -c lumora-local -n __fish_use_subcommand -f -a sample -d 'Write a sample of each kind of artefact'
 complete -c lumora-local -n __fish_use_subcommand -f -a serve -d 'Answer lookups over HTTPS'
 complete -c lumora-local -n __fish_use_subcommand -l version -d 'Print the version'

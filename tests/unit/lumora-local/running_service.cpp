@@ -86,8 +86,9 @@ Outcome runProgram(const std::vector<std::string>& arguments) {
     return {exitStatusOf(status), readFile(directory / "out"), readFile(directory / "err")};
 }
 
-RunningService::RunningService(const std::vector<std::string>& options)
+RunningService::RunningService(const std::vector<std::string>& options, const std::string& settings)
     : directory_(ServiceDirectory::create(path_, {}, Date::now())) {
+    if (!settings.empty()) pinwell::test::writeFile(directory_.descriptionPath(), settings);
     std::vector<std::string> arguments{"serve",       path_,          "--listen",
                                        "127.0.0.1:0", "--ready-file", temporary_ / "ready"};
     arguments.insert(arguments.end(), options.begin(), options.end());

@@ -34,7 +34,8 @@ Outcome runProgram(const std::vector<std::string>& arguments);
 /// A service in a directory of its own, serving on a free loopback port until the test ends.
 class RunningService {
   public:
-    explicit RunningService(const std::vector<std::string>& options = {});
+    /// `settings` takes the place of service.json, unless it is empty.
+    explicit RunningService(const std::vector<std::string>& options = {}, const std::string& settings = {});
     ~RunningService();
 
     /// A fresh record with a ticket over made-up hashes; answers its name.

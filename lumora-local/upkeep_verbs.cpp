@@ -1,9 +1,10 @@
-#include "lumora-local/key_verbs.h"
+#include "lumora-local/upkeep_verbs.h"
 
 #include <CLI/CLI.hpp>
 
 #include "foundation/date.h"
 #include "foundation/format.h"
+#include "lumora-local/backup.h"
 #include "lumora-local/check_command.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/key_rotation.h"
@@ -17,7 +18,7 @@ namespace {
 using foundation::Date;
 using foundation::format;
 
-ServiceDirectory openNamed(KeyVerbs& verbs) {
+ServiceDirectory openNamed(UpkeepVerbs& verbs) {
     takeDirectory(verbs.directory, verbs.words);
     return ServiceDirectory::open(requireDirectory(verbs.directory));
 }
@@ -26,7 +27,7 @@ void print(const RotationReport& report) {
     for (const std::string& line : report) writeText(line + "\n");
 }
 
-void runRotate(KeyVerbs& verbs) {
+void runRotate(UpkeepVerbs& verbs) {
     const ServiceDirectory directory = openNamed(verbs);
     if (verbs.words.size() != 1 || (verbs.words[0] != "signer" && verbs.words[0] != "server")) {
         throw Failure(EX_USAGE, "rotate needs one word, signer or server");
@@ -47,14 +48,14 @@ void runRotate(KeyVerbs& verbs) {
     print(rotateSigner(directory, {verbs.key, verbs.requestFile}, Date::now()));
 }
 
-void runCertify(KeyVerbs& verbs) {
+void runCertify(UpkeepVerbs& verbs) {
     const ServiceDirectory directory = openNamed(verbs);
     if (verbs.words.size() != 1)
         throw Failure(EX_USAGE, "certify needs one file with the chain of certificates");
     print(certifySignerElsewhere(directory, verbs.words[0], verbs.key, Date::now()));
 }
 
-void runCheck(KeyVerbs& verbs) {
+void runCheck(UpkeepVerbs& verbs) {
     const auto warning = parseDuration(verbs.warning);
     if (!warning) throw Failure(EX_USAGE, format("%@ is no length of time: 12h, 30d or 8w", verbs.warning));
     const ServiceDirectory directory = ServiceDirectory::open(requireDirectory(verbs.directory));
@@ -63,11 +64,24 @@ void runCheck(KeyVerbs& verbs) {
     verbs.exitStatus = exitStatusOf(findings);
 }
 
+void runBackup(UpkeepVerbs& verbs) {
+    const ServiceDirectory directory = openNamed(verbs);
+    if (verbs.words.size() != 1) throw Failure(EX_USAGE, "backup needs one FILE to make");
+    backUp(directory, verbs.words[0]);
+}
+
+void runRestore(const UpkeepVerbs& verbs) {
+    if (verbs.file.empty()) throw Failure(EX_USAGE, "restore needs a FILE that backup has made");
+    const std::string directory = requireDirectory(verbs.directory);
+    restore(verbs.file, directory);
+    writeText(format("Restored the service to %@.\n", directory));
+}
+
 constexpr const char* kServiceHelpText = "The service (default: $LUMORA_DIR)";
 
 }  // namespace
 
-void declareKeyVerbs(CLI::App& app, KeyVerbs& verbs) {
+void declareUpkeepVerbs(CLI::App& app, UpkeepVerbs& verbs) {
     CLI::App* rotate = app.add_subcommand("rotate", "Replace the key of the signer or the server");
     rotate->add_option("DIR", verbs.directory, kServiceHelpText);
     rotate->add_option("signer|server", verbs.words, "Whose key");
@@ -90,6 +104,16 @@ void declareKeyVerbs(CLI::App& app, KeyVerbs& verbs) {
     check->add_option("--warn", verbs.warning, "How long before its end a certificate is complained about")
         ->capture_default_str();
     check->callback([&verbs] { runCheck(verbs); });
+
+    CLI::App* backup = app.add_subcommand("backup", "Write the whole service into one file, while it runs");
+    backup->add_option("DIR", verbs.directory, kServiceHelpText);
+    backup->add_option("FILE", verbs.words, "The file to make");
+    backup->callback([&verbs] { runBackup(verbs); });
+
+    CLI::App* restore = app.add_subcommand("restore", "Make a service from such a file");
+    restore->add_option("FILE", verbs.file, "What backup has made");
+    restore->add_option("DIR", verbs.directory, "The directory to make (default: $LUMORA_DIR)");
+    restore->callback([&verbs] { runRestore(verbs); });
 }
 
 }  // namespace pinwell::lumora

@@ -1,4 +1,4 @@
-// The commands about keys and certificates: certify, rotate, check.
+// The commands that look after a service: rotate, certify, check, backup, restore.
 #pragma once
 
 #include <string>
@@ -11,9 +11,10 @@ class App;
 namespace pinwell::lumora {
 
 /// What their command lines say, as text. Must outlive the parsing.
-struct KeyVerbs {
+struct UpkeepVerbs {
     std::string directory;
     std::vector<std::string> words;  // after the directory
+    std::string file;                // restore: the backup
     std::string key;
     std::string rootDirectory;
     std::string requestFile;
@@ -21,6 +22,6 @@ struct KeyVerbs {
     int exitStatus = 0;  // of the program, once the command has run
 };
 
-void declareKeyVerbs(CLI::App& app, KeyVerbs& verbs);
+void declareUpkeepVerbs(CLI::App& app, UpkeepVerbs& verbs);
 
 }  // namespace pinwell::lumora

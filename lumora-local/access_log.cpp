@@ -1,0 +1,53 @@
+#include "lumora-local/access_log.h"
+
+#include "foundation/format.h"
+#include "foundation/json.h"
+#include "foundation/value.h"
+#include "lumora-local/rfc3339.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::Array;
+using foundation::Dictionary;
+using foundation::Value;
+
+/// JSON is UTF-8. What a client sends need not be, and control characters drive terminals.
+std::string printable(std::string_view text) {
+    return foundation::escapeForTerminal(text);
+}
+
+std::string jsonLine(Dictionary members) {
+    const auto document = foundation::serializeJSON(Value(std::move(members)));
+    return document ? foundation::toString(*document) : std::string(R"({"level":"error"})");
+}
+
+}  // namespace
+
+std::string describeRequest(const RequestEntry& entry, LogForm form) {
+    if (form == LogForm::text) {
+        return foundation::format("%@ %s \"%s %s\" %d %zu %s", entry.time, entry.peer, entry.method,
+                                  entry.target, entry.status, entry.size, entry.identifier);
+    }
+    Array records;
+    if (entry.records != nullptr) {
+        for (const std::string& name : *entry.records) records.emplace_back(printable(name));
+    }
+    return jsonLine({{"time", toRfc3339(entry.time)},
+                     {"level", "info"},
+                     {"message", "request"},
+                     {"peer", entry.peer},
+                     {"method", printable(entry.method)},
+                     {"target", printable(entry.target)},
+                     {"status", entry.status},
+                     {"bytes", std::uint64_t{entry.size}},
+                     {"request", entry.identifier},
+                     {"records", std::move(records)},
+                     {"microseconds", std::int64_t{entry.duration.count()}}});
+}
+
+std::string messageAsJson(foundation::Date time, std::string_view level, std::string_view message) {
+    return jsonLine({{"time", toRfc3339(time)}, {"level", level}, {"message", printable(message)}});
+}
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,37 @@
+// One line for each request: for people, or as JSON for programs.
+#pragma once
+
+#include <chrono>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "foundation/date.h"
+
+namespace pinwell::lumora {
+
+enum class LogForm {
+    text,
+    json,  ///< one object a line, everything on standard output
+};
+
+/// A request that was answered. Texts are as the client sent them.
+struct RequestEntry {
+    foundation::Date time;
+    std::string_view peer;
+    std::string_view method;  // empty if the head could not be read
+    std::string_view target;
+    int status = 0;
+    std::size_t size = 0;                               // of the answer's body
+    std::string_view identifier;                        // as in X-Ostrel-Request-UUID
+    const std::vector<std::string>* records = nullptr;  // that were looked up; may be null
+    std::chrono::microseconds duration{};               // from the request's first byte to its answer
+};
+
+/// Without a newline.
+std::string describeRequest(const RequestEntry& entry, LogForm form);
+
+/// A line about the service itself: {"time", "level", "message"}. `level` is info or error.
+std::string messageAsJson(foundation::Date time, std::string_view level, std::string_view message);
+
+}  // namespace pinwell::lumora
