@@ -26,13 +26,16 @@ testing::Matcher<const Value&> Reports(const std::string& cause, int exitStatus)
 }
 
 Command BatchTest::batchCommand(std::vector<std::string> arguments) const {
+    orderWithService();
     Command made = command(std::move(arguments));
     made.executable = PINWELL_BATCH_PROGRAM;
     return made;
 }
 
 ProcessResult BatchTest::batch(std::vector<std::string> arguments) const {
-    return runProcess(batchCommand(std::move(arguments)));
+    ProcessResult result = runProcess(batchCommand(std::move(arguments)));
+    orderWithService();
+    return result;
 }
 
 ProcessResult BatchTest::batch(std::vector<std::string> arguments,
@@ -42,6 +45,7 @@ ProcessResult BatchTest::batch(std::vector<std::string> arguments,
 }
 
 Command BatchTest::ticketCommand(std::vector<std::string> arguments) const {
+    orderWithService();
     Command made = command(std::move(arguments));
     made.executable = PINWELL_TICKET_PROGRAM;
     return made;
@@ -93,6 +97,7 @@ std::vector<std::string> BatchTest::namesIn(const RecordedRequest& request) {
 }
 
 std::string BatchTest::bodyFor(const std::vector<std::string>& names) const {
+    const std::lock_guard order(served_);
     std::string body;
     for (const std::string& name : names) {
         body += body.empty() ? "" : ",";

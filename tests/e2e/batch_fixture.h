@@ -7,6 +7,7 @@
 #pragma once
 
 #include <map>
+#include <mutex>
 #include <string>
 #include <vector>
 
@@ -68,8 +69,15 @@ class BatchTest : public EndToEndTest {
     static bool isStapled(const Artefact& artefact, const Data& ticket);
     std::size_t countStapled(const std::vector<Artefact>& artefacts) const;
 
-    /// By name: a ticket, or nothing where the service has none.
+    /// By name: a ticket, or nothing where the service has none. Changed between runs, read by the service's
+    /// threads during them.
     std::map<std::string, std::optional<Data>> records;
+
+  private:
+    /// A run orders what the test does before and after it and what the service does meanwhile. Language and
+    /// ThreadSanitizer know nothing of other processes: this says the same to them.
+    void orderWithService() const { const std::lock_guard order(served_); }
+    mutable std::mutex served_;
 };
 
 }  // namespace pinwell::test
