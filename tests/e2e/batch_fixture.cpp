@@ -52,7 +52,9 @@ Command BatchTest::ticketCommand(std::vector<std::string> arguments) const {
 }
 
 ProcessResult BatchTest::ticketTool(std::vector<std::string> arguments) const {
-    return runProcess(ticketCommand(std::move(arguments)));
+    ProcessResult result = runProcess(ticketCommand(std::move(arguments)));
+    orderWithService();
+    return result;
 }
 
 std::vector<Artefact> BatchTest::writeImages(std::size_t count, const std::string& folder) {
@@ -97,7 +99,7 @@ std::vector<std::string> BatchTest::namesIn(const RecordedRequest& request) {
 }
 
 std::string BatchTest::bodyFor(const std::vector<std::string>& names) const {
-    const std::lock_guard order(served_);
+    const std::lock_guard order(serving);
     std::string body;
     for (const std::string& name : names) {
         body += body.empty() ? "" : ",";

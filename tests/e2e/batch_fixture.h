@@ -73,11 +73,13 @@ class BatchTest : public EndToEndTest {
     /// threads during them.
     std::map<std::string, std::optional<Data>> records;
 
+    /// Held by what the service does with what the test has.
+    mutable std::mutex serving;
+
   private:
     /// A run orders what the test does before and after it and what the service does meanwhile. Language and
     /// ThreadSanitizer know nothing of other processes: this says the same to them.
-    void orderWithService() const { const std::lock_guard order(served_); }
-    mutable std::mutex served_;
+    void orderWithService() const { const std::lock_guard order(serving); }
 };
 
 }  // namespace pinwell::test

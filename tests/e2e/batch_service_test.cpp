@@ -312,14 +312,16 @@ class BatchAssets : public BatchService {
   protected:
     /// Names an asset in the place of each ticket. `asset` answers what is fetched.
     void serveAssets(std::function<Response(const std::string& recordName)> asset) {
-        service().setHandler([this, asset = std::move(asset)](const RecordedRequest& request) {
+        const std::string assets = service().url("/asset/");
+        service().setHandler([this, asset = std::move(asset), assets](const RecordedRequest& request) {
+            const std::lock_guard order(serving);
             if (request.method != "POST") return asset(nameIn(request.target));
             std::string body;
             for (const std::string& name : namesIn(request)) {
                 const Data& ticket = *records.at(name);
                 body += (body.empty() ? "" : ",") + (R"({"recordName":")" + name) +
                         R"(","fields":{"signedTicketAsset":{"value":{"downloadURL":")" +
-                        service().url("/asset/" + name + "/${f}") + R"(","size":)" +
+                        assets + name + R"(/${f}","size":)" +
                         std::to_string(ticket.size()) + "}}}}";
             }
             return answer(R"({"records":[)" + body + "]}");

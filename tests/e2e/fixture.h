@@ -70,6 +70,9 @@ class EndToEndTest : public testing::Test {
   protected:
     EndToEndTest();
 
+    /// Ends the service before what it refers to, in the fixtures on this one.
+    void TearDown() override { service_.reset(); }
+
     // Running the tool.
 
     Command command(std::vector<std::string> arguments) const;

@@ -213,6 +213,7 @@ class LyingProxy : public ProxyTest {
         EXPECT_THAT(service().connections(), IsEmpty());
         EXPECT_EQ(stapled(), std::nullopt);
         EXPECT_THAT(temporaryFiles(), IsEmpty());
+        ProxyTest::TearDown();
     }
     ProcessResult stapleThrough(Script script) {
         proxy.enqueue(std::move(script));

@@ -27,6 +27,7 @@ class Transport : public EndToEndTest {
         if (!stapled()) {
             EXPECT_THAT(temporaryFiles(), IsEmpty());
         }
+        EndToEndTest::TearDown();
     }
 
     const std::string body = inlineRecord(ticket());
