@@ -320,9 +320,8 @@ class BatchAssets : public BatchService {
             for (const std::string& name : namesIn(request)) {
                 const Data& ticket = *records.at(name);
                 body += (body.empty() ? "" : ",") + (R"({"recordName":")" + name) +
-                        R"(","fields":{"signedTicketAsset":{"value":{"downloadURL":")" +
-                        assets + name + R"(/${f}","size":)" +
-                        std::to_string(ticket.size()) + "}}}}";
+                        R"(","fields":{"signedTicketAsset":{"value":{"downloadURL":")" + assets + name +
+                        R"(/${f}","size":)" + std::to_string(ticket.size()) + "}}}}";
             }
             return answer(R"({"records":[)" + body + "]}");
         });

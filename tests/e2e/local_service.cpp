@@ -21,8 +21,9 @@ LocalServiceTest::LocalServiceTest() {
             made.push_back(std::filesystem::path(path).filename());
         return made;
     }();
-    std::filesystem::copy(pattern.path(), directory.path(),
-                          std::filesystem::copy_options::recursive | std::filesystem::copy_options::copy_symlinks);
+    std::filesystem::copy(
+        pattern.path(), directory.path(),
+        std::filesystem::copy_options::recursive | std::filesystem::copy_options::copy_symlinks);
     for (const std::string& name : names) samples.push_back(directory / "samples/" + name);
     environment["PINWELL_PLATFORM"] = serviceDirectory + "/platform";
 }
