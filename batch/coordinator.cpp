@@ -217,7 +217,7 @@ void Coordinator::endOverdue() {
 
 void Coordinator::endAllUndone(Cause cause) {
     const int status = signal_ ? companion::kSignalBase + *signal_ : kExitNoHost;
-    const auto endThese = [&](std::deque<ItemRef> items) {
+    const auto endThese = [&](const std::deque<ItemRef>& items) {
         for (const ItemRef& item : items)
             if (!item->hasEnded) end(item, {status, cause});
     };

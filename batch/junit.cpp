@@ -6,6 +6,7 @@
 
 #include <array>
 #include <cerrno>
+#include <cmath>
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
@@ -25,7 +26,7 @@ constexpr std::size_t kReportPieceSize = std::size_t{64} * 1024;
 constexpr std::size_t kCountsWidth = 160;
 
 std::string secondsText(double seconds) {
-    const auto milliseconds = static_cast<std::uint64_t>(seconds * 1000 + 0.5);
+    const auto milliseconds = static_cast<std::uint64_t>(std::llround(seconds * 1000));
     std::string fraction = std::to_string(milliseconds % 1000);
     return std::to_string(milliseconds / 1000) + "." + std::string(3 - fraction.size(), '0') + fraction;
 }

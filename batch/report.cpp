@@ -58,7 +58,7 @@ std::string asText(const Summary& summary) {
     }
     if (summary.resumed > 0) text += foundation::format("; %llu done before", summary.resumed);
     if (summary.duplicates > 0) text += foundation::format("; %llu named twice", summary.duplicates);
-    const auto tenths = static_cast<std::uint64_t>(summary.seconds * 10 + 0.5);
+    const auto tenths = static_cast<std::uint64_t>(std::llround(summary.seconds * 10));
     return text + foundation::format("; %llu.%llu s", tenths / 10, tenths % 10);
 }
 
