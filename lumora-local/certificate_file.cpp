@@ -35,9 +35,7 @@ std::vector<CertificateHandle> readCertificateFiles(const std::string& path, std
 std::string encodeCertificate(X509* certificate) {
     const BioHandle pem(BIO_new(BIO_s_mem()));
     require(pem != nullptr && PEM_write_bio_X509(pem.get(), certificate) == 1, "encode a certificate");
-    char* text = nullptr;
-    const long length = BIO_get_mem_data(pem.get(), &text);
-    return {text, static_cast<std::size_t>(length)};
+    return textOf(pem.get());
 }
 
 std::string nameOf(X509* certificate) {

@@ -165,9 +165,7 @@ std::string requestCertificate(const CertificateProfile& profile, EVP_PKEY* key)
     const BioHandle pem(BIO_new(BIO_s_mem()));
     require(pem != nullptr && PEM_write_bio_X509_REQ(pem.get(), request.get()) == 1,
             "encode a certificate request");
-    char* text = nullptr;
-    const long length = BIO_get_mem_data(pem.get(), &text);
-    return {text, static_cast<std::size_t>(length)};
+    return textOf(pem.get());
 }
 
 }  // namespace pinwell::lumora

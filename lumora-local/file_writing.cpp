@@ -107,6 +107,17 @@ std::string temporarySiblingOf(const std::string& path) {
     return (file.parent_path() / name).string();
 }
 
+std::string freeName(const std::string& path, const std::string& suffix) {
+    const std::string first = path + suffix;
+    std::string name = first;
+    std::error_code ignored;
+    for (int attempt = 2; std::filesystem::exists(std::filesystem::symlink_status(name, ignored));
+         ++attempt) {
+        name = first + "." + std::to_string(attempt);
+    }
+    return name;
+}
+
 PendingDirectory::PendingDirectory(std::string finalPath, mode_t mode)
     : finalPath_(withoutTrailingSlashes(std::move(finalPath))), path_(temporarySiblingOf(finalPath_)) {
     // The rename at the end decides; this only spares the work, and names the cause.

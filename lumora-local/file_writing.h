@@ -30,6 +30,9 @@ void flushDirectory(const std::string& path);
 /// A name for a hidden sibling of `path` that nothing else uses; nothing is made.
 std::string temporarySiblingOf(const std::string& path);
 
+/// `path` and `suffix`, with a number behind them where there is such a name already.
+std::string freeName(const std::string& path, const std::string& suffix);
+
 /// A directory under construction beside its final place. It is removed again unless it is published.
 class PendingDirectory {
   public:

@@ -1,10 +1,8 @@
 #include "lumora-local/key_file.h"
 
-#include <fcntl.h>
 #include <malloc.h>
 #include <openssl/crypto.h>
 #include <openssl/pkcs12.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -12,11 +10,11 @@
 #include <cstdlib>
 #include <cstring>
 #include <exception>
+#include <span>
 
-#include "foundation/error.h"
-#include "foundation/file_io.h"
 #include "foundation/format.h"
 #include "lumora-local/passphrase.h"
+#include "lumora-local/secret_file.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -40,21 +38,10 @@ class WipedBuffer {
 
 // Returns the number of bytes, or throws.
 std::size_t readInto(WipedBuffer& buffer, const std::string& path) {
-    const auto fail = [&](int reason) {
-        throw Failure(EX_NOINPUT, foundation::Error::posix(reason, path).localizedDescription());
-    };
-    const foundation::FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY | O_NONBLOCK));
-    if (!file) fail(errno);
-    std::size_t length = 0;
-    while (length < WipedBuffer::size()) {
-        const ssize_t count = ::read(file.get(), buffer.data() + length, WipedBuffer::size() - length);
-        if (count < 0 && errno == EINTR) continue;
-        if (count < 0) fail(errno);
-        if (count == 0) return length;
-        length += static_cast<std::size_t>(count);
-    }
-    fail(EFBIG);
-    return 0;
+    const std::size_t length =
+        readSecret(openSecret(path), path, std::span(buffer.data(), WipedBuffer::size()));
+    if (length == WipedBuffer::size()) failToReadSecret(path, EFBIG);
+    return length;
 }
 
 using PrivateKeyInfoHandle = foundation::Handle<PKCS8_PRIV_KEY_INFO, PKCS8_PRIV_KEY_INFO_free>;
@@ -158,9 +145,7 @@ std::string encodeKey(EVP_PKEY* key, std::string_view passphrase) {
         static_cast<void>(algorithm.release());  // the encrypted key has it
         require(PEM_write_bio_PKCS8(pem.get(), encrypted.get()) == 1, "encrypt a key");
     }
-    char* text = nullptr;
-    const long length = BIO_get_mem_data(pem.get(), &text);
-    return {text, static_cast<std::size_t>(length)};
+    return textOf(pem.get());
 }
 
 void wipe(std::string& text) {

@@ -45,4 +45,23 @@ inline void require(bool succeeded, std::string_view action) {
     if (!succeeded) throw openSSLFailure(action);
 }
 
+/// DER by one of the library's encoders (i2d_X509 and its kind).
+template <class Object>
+foundation::Data encodeDer(int (*encoder)(Object*, unsigned char**), Object* object,
+                           std::string_view action) {
+    const int length = encoder(object, nullptr);
+    require(length > 0, action);
+    foundation::Data der(static_cast<std::size_t>(length));
+    unsigned char* end = octets(der);
+    require(encoder(object, &end) == length, action);
+    return der;
+}
+
+/// What was written into a BIO in memory.
+inline std::string textOf(BIO* memory) {
+    char* text = nullptr;
+    const long length = BIO_get_mem_data(memory, &text);
+    return {text, static_cast<std::size_t>(length)};
+}
+
 }  // namespace pinwell::lumora

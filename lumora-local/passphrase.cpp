@@ -1,18 +1,17 @@
 #include "lumora-local/passphrase.h"
 
-#include <fcntl.h>
 #include <openssl/crypto.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <cstdlib>
+#include <span>
 
-#include "foundation/error.h"
 #include "foundation/file_io.h"
 #include "foundation/format.h"
 #include "lumora-local/failure.h"
+#include "lumora-local/secret_file.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -27,24 +26,13 @@ Passphrase::~Passphrase() {
 
 void Passphrase::read(const std::string& place) {
     const std::string path = pathOfPassphrase(place);
-    const auto fail = [&](int reason) {
-        throw Failure(EX_NOINPUT, foundation::Error::posix(reason, path).localizedDescription());
-    };
-    const foundation::FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY | O_NONBLOCK));
-    if (!file) fail(errno);
+    const foundation::FileDescriptor file = openSecret(path);
     struct stat status {};
-    if (::fstat(file.get(), &status) != 0) fail(errno);
+    if (::fstat(file.get(), &status) != 0) failToReadSecret(path, errno);
     if (!S_ISREG(status.st_mode)) {
         throw Failure(EX_CONFIG, foundation::format("the passphrase file %@ is no regular file", path));
     }
-    std::size_t length = 0;
-    while (length < text_.size()) {
-        const ssize_t count = ::read(file.get(), text_.data() + length, text_.size() - length);
-        if (count < 0 && errno == EINTR) continue;
-        if (count < 0) fail(errno);
-        if (count == 0) break;
-        length += static_cast<std::size_t>(count);
-    }
+    const std::size_t length = readSecret(file, path, std::as_writable_bytes(std::span(text_)));
     const auto* const end =
         std::find(text_.begin(), text_.begin() + static_cast<std::ptrdiff_t>(length), '\n');
     length_ = static_cast<std::size_t>(end - text_.begin());

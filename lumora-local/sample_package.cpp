@@ -82,23 +82,15 @@ class Signer {
         const MessageHandle message(CMS_sign(leaf_.certificate.get(), leaf_.key.get(), others.get(),
                                              input.get(), CMS_BINARY | CMS_DETACHED | CMS_NOSMIMECAP));
         require(message != nullptr, "sign a package");
-        const int length = i2d_CMS_ContentInfo(message.get(), nullptr);
-        require(length > 0, "encode a signature");
-        Data encoded(static_cast<std::size_t>(length));
-        unsigned char* out = octets(encoded);
-        require(i2d_CMS_ContentInfo(message.get(), &out) == length, "encode a signature");
-        return encoded;
+        return encodeDer<const CMS_ContentInfo>(i2d_CMS_ContentInfo, message.get(), "encode a signature");
     }
 
     /// KeyInfo of XML signatures, with the chain in base64 of DER, leaf first.
     std::string keyInfo() const {
         std::string certificates;
         for (const IssuedCertificate* issued : {&leaf_, &root_}) {
-            const int length = i2d_X509(issued->certificate.get(), nullptr);
-            require(length > 0, "encode a certificate");
-            Data encoded(static_cast<std::size_t>(length));
-            unsigned char* out = octets(encoded);
-            require(i2d_X509(issued->certificate.get(), &out) == length, "encode a certificate");
+            const Data encoded =
+                encodeDer<const X509>(i2d_X509, issued->certificate.get(), "encode a certificate");
             certificates +=
                 format("<X509Certificate>%@</X509Certificate>", foundation::encodeBase64(encoded));
         }

@@ -50,28 +50,20 @@ Data jsonDocument(const Value& value) {
     return *std::move(document);
 }
 
-Value readJson(const std::string& path) {
-    const Result<Data> bytes = foundation::readSmallFile(path, kMaximumDescriptionSize);
-    if (!bytes) throw Failure(EX_CONFIG, bytes.error().localizedDescription());
-    Result<Value> value = foundation::parseJSON(*bytes);
+Value parseJson(const Data& bytes, const std::string& path) {
+    Result<Value> value = foundation::parseJSON(bytes);
     if (!value) throw Failure(EX_CONFIG, format("%@: %@", path, value.error().localizedDescription()));
     return *std::move(value);
 }
 
-Value platformDescription(const Endpoint& endpoint) {
-    return Dictionary{{std::string(kLumoraKey), Dictionary{{std::string(kHostKey), toString(endpoint)}}}};
+Value readJson(const std::string& path) {
+    const Result<Data> bytes = foundation::readSmallFile(path, kMaximumDescriptionSize);
+    if (!bytes) throw Failure(EX_CONFIG, bytes.error().localizedDescription());
+    return parseJson(*bytes, path);
 }
 
-/// A name beside `path` that nothing has.
-std::string freeNameBeside(const std::string& path) {
-    const std::string first = path + ".before-migration";
-    std::string name = first;
-    std::error_code ignored;
-    for (int attempt = 2; std::filesystem::exists(std::filesystem::symlink_status(name, ignored));
-         ++attempt) {
-        name = first + "." + std::to_string(attempt);
-    }
-    return name;
+Value platformDescription(const Endpoint& endpoint) {
+    return Dictionary{{std::string(kLumoraKey), Dictionary{{std::string(kHostKey), toString(endpoint)}}}};
 }
 
 void writeCertificate(const std::string& directory, const std::string& name, const Identity& identity) {
@@ -196,7 +188,7 @@ ServiceDirectory ServiceDirectory::open(const std::string& path) {
         throw Failure(EX_NOINPUT, format("%@ holds no record service that can be read: %@", path,
                                          bytes.error().localizedDescription()));
     }
-    return {path, parseServiceSettings(readJson(description), description)};
+    return {path, parseServiceSettings(parseJson(*bytes, description), description)};
 }
 
 TicketSigner ServiceDirectory::openSigner() const {
@@ -225,7 +217,7 @@ void ServiceDirectory::changeSettings(const std::function<void(Dictionary&)>& ch
 }
 
 std::string ServiceDirectory::moveStore(const std::string& url) const {
-    const std::string kept = freeNameBeside(descriptionPath());
+    const std::string kept = freeName(descriptionPath(), ".before-migration");
     writeNewFile(kept, jsonDocument(readJson(descriptionPath())), kPublicFileMode);
     changeSettings([&](Dictionary& settings) { settings["store"] = url; });
     return kept;

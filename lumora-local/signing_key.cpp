@@ -22,12 +22,7 @@ class KeyFromFile final : public SigningKey {
     explicit KeyFromFile(KeyHandle key) : key_(std::move(key)) {}
 
     Data publicKey() const override {
-        const int length = i2d_PUBKEY(key_.get(), nullptr);
-        require(length > 0, "encode a public key");
-        Data der(static_cast<std::size_t>(length));
-        unsigned char* end = octets(der);
-        require(i2d_PUBKEY(key_.get(), &end) == length, "encode a public key");
-        return der;
+        return encodeDer<const EVP_PKEY>(i2d_PUBKEY, key_.get(), "encode a public key");
     }
 
     Data sign(ByteView message) const override {

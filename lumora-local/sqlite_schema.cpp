@@ -77,21 +77,9 @@ void setVersion(SQLite::Database& database) {
     database.exec("PRAGMA user_version = " + std::to_string(kCurrentVersion));
 }
 
-/// A name beside `path` that nothing has.
-std::string freeCopyName(const std::string& path, int version) {
-    const std::string first = path + ".version-" + std::to_string(version);
-    std::string name = first;
-    std::error_code ignored;
-    for (int attempt = 2; std::filesystem::exists(std::filesystem::symlink_status(name, ignored));
-         ++attempt) {
-        name = first + "." + std::to_string(attempt);
-    }
-    return name;
-}
-
 /// A copy as of the last commit, through a connection of its own: the caller's transaction goes on meanwhile.
 void keepCopy(const std::string& path, int version) {
-    const std::string copy = freeCopyName(path, version);
+    const std::string copy = freeName(path, ".version-" + std::to_string(version));
     writeNewFile(copy, {}, 0600);
     try {
         SQLite::Database reader(path, SQLite::OPEN_READWRITE, kBusyTimeoutMilliseconds);

@@ -37,12 +37,7 @@ void requireEncodable(const CodeHash& hash, bool withAlgorithm) {
 }
 
 void appendDer(Data& data, X509* certificate) {
-    const int length = i2d_X509(certificate, nullptr);
-    require(length > 0, "encode a certificate");
-    Data der(static_cast<std::size_t>(length));
-    unsigned char* end = octets(der);
-    i2d_X509(certificate, &end);
-    foundation::append(data, der);
+    foundation::append(data, encodeDer<const X509>(i2d_X509, certificate, "encode a certificate"));
 }
 
 Data derSequence(const Data& contents) {

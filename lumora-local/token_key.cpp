@@ -150,12 +150,7 @@ Data publicKeyOf(const std::string& uri, Data point) {
                 EVP_PKEY_fromdata(context.get(), &made, EVP_PKEY_PUBLIC_KEY, parameters.get()) == 1,
             "use the public key in the token");
     const KeyHandle key(made);
-    const int length = i2d_PUBKEY(key.get(), nullptr);
-    require(length > 0, "encode a public key");
-    Data der(static_cast<std::size_t>(length));
-    unsigned char* end = octets(der);
-    i2d_PUBKEY(key.get(), &end);
-    return der;
+    return encodeDer<const EVP_PKEY>(i2d_PUBKEY, key.get(), "encode a public key");
 }
 
 }  // namespace
@@ -268,12 +263,7 @@ Data TokenKey::signDigest(ByteView digest) const {
             "encode a signature");
     static_cast<void>(r.release());  // the signature has them
     static_cast<void>(s.release());
-    const int size = i2d_ECDSA_SIG(signature.get(), nullptr);
-    require(size > 0, "encode a signature");
-    Data der(static_cast<std::size_t>(size));
-    unsigned char* end = octets(der);
-    i2d_ECDSA_SIG(signature.get(), &end);
-    return der;
+    return encodeDer<const ECDSA_SIG>(i2d_ECDSA_SIG, signature.get(), "encode a signature");
 }
 
 }  // namespace pinwell::lumora
