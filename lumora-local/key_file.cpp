@@ -1,18 +1,14 @@
 #include "lumora-local/key_file.h"
 
-#include <malloc.h>
 #include <openssl/crypto.h>
 #include <openssl/pkcs12.h>
 
-#include <algorithm>
-#include <cerrno>
 #include <cstddef>
-#include <cstdlib>
 #include <cstring>
 #include <exception>
-#include <span>
 
 #include "foundation/format.h"
+#include "foundation/secret_file.h"
 #include "lumora-local/passphrase.h"
 #include "lumora-local/secret_file.h"
 
@@ -20,29 +16,6 @@ namespace pinwell::lumora {
 namespace {
 
 constexpr std::size_t kMaximumKeyFile = std::size_t{64} * 1024;
-
-// Room that is wiped when it goes.
-class WipedBuffer {
-  public:
-    WipedBuffer() = default;
-    ~WipedBuffer() { OPENSSL_cleanse(bytes_.data(), bytes_.size()); }
-    WipedBuffer(const WipedBuffer&) = delete;
-    WipedBuffer& operator=(const WipedBuffer&) = delete;
-
-    std::byte* data() noexcept { return bytes_.data(); }
-    static constexpr std::size_t size() noexcept { return kMaximumKeyFile + 1; }
-
-  private:
-    std::array<std::byte, kMaximumKeyFile + 1> bytes_{};
-};
-
-// Returns the number of bytes, or throws.
-std::size_t readInto(WipedBuffer& buffer, const std::string& path) {
-    const std::size_t length =
-        readSecret(openSecret(path), path, std::span(buffer.data(), WipedBuffer::size()));
-    if (length == WipedBuffer::size()) failToReadSecret(path, EFBIG);
-    return length;
-}
 
 using PrivateKeyInfoHandle = foundation::Handle<PKCS8_PRIV_KEY_INFO, PKCS8_PRIV_KEY_INFO_free>;
 using AlgorithmHandle = foundation::Handle<X509_ALGOR, X509_ALGOR_free>;
@@ -78,37 +51,13 @@ int givePassphrase(char* buffer, int size, int, void* context) {
     }
 }
 
-void* allocate(std::size_t size, const char*, int) {
-    return std::malloc(size);
-}
-
-void release(void* memory, const char*, int) {
-    if (memory == nullptr) return;
-    OPENSSL_cleanse(memory, malloc_usable_size(memory));
-    std::free(memory);
-}
-
-// Not by realloc(3), which leaves the old place as it is when it moves.
-void* reallocate(void* memory, std::size_t size, const char* file, int line) {
-    void* const moved = size == 0 ? nullptr : std::malloc(size);
-    if (memory == nullptr) return moved;
-    if (size != 0 && moved == nullptr) return nullptr;
-    if (moved != nullptr) std::memcpy(moved, memory, std::min(size, malloc_usable_size(memory)));
-    release(memory, file, line);
-    return moved;
-}
-
 }  // namespace
 
-bool wipeWhatOpenSSLFrees() noexcept {
-    return CRYPTO_set_mem_functions(allocate, reallocate, release) == 1;
-}
-
 KeyHandle readKeyFile(const std::string& path, const std::string& passphraseFile) {
-    WipedBuffer buffer;
-    const auto length = static_cast<int>(readInto(buffer, path));
+    foundation::WipedRoom<kMaximumKeyFile + 1> room;
+    const auto length = static_cast<int>(secretOf(foundation::readSecretFile(path, room.bytes())));
     // Reads from the buffer itself, and copies nothing.
-    const BioHandle pem(BIO_new_mem_buf(buffer.data(), length));
+    const BioHandle pem(BIO_new_mem_buf(room.bytes().data(), length));
     require(pem != nullptr, "read a PEM file");
     PassphraseRequest request{passphraseFile, false, nullptr};
     KeyHandle key(PEM_read_bio_PrivateKey(pem.get(), nullptr, givePassphrase, &request));

@@ -8,10 +8,6 @@
 
 namespace pinwell::lumora {
 
-/// Has OpenSSL wipe all memory that it frees, for it wipes only some of what a key goes through. To be called
-/// before it has allocated any, before everything else in main; returns false if it is too late.
-bool wipeWhatOpenSSLFrees() noexcept;
-
 /// Reads the PEM file of a private key; an encrypted one is opened with the passphrase at `passphraseFile`
 /// (passphrase.h), which is read only then. Whatever buffers its text went through are wiped; the key's own
 /// memory is wiped when its last reference goes. Throws Failure: EX_NOINPUT if a file cannot be read,

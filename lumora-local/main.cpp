@@ -18,8 +18,6 @@
 #include "lumora-local/commands.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/history.h"
-#include "lumora-local/key_file.h"
-#include "lumora-local/upkeep_verbs.h"
 #include "lumora-local/migration.h"
 #include "lumora-local/pinwell_artefact_hasher.h"
 #include "lumora-local/rfc3339.h"
@@ -29,8 +27,10 @@
 #include "lumora-local/service_place.h"
 #include "lumora-local/store_opening.h"
 #include "lumora-local/terminal.h"
+#include "lumora-local/upkeep_verbs.h"
 #include "sandbox/sandbox.h"
 #include "src/confinement.h"
+#include "trust/openssl_memory.h"
 
 namespace {
 
@@ -373,7 +373,7 @@ int run(int argc, char** argv) {
 }  // namespace
 
 int main(int argc, char** argv) {
-    wipeWhatOpenSSLFrees();
+    trust::wipeWhatOpenSSLFrees();
     foundation::occupyStandardStreams();
     sandbox::forbidCoreDumps();  // they would hold the keys
     // A client that has gone away is an error of one write, not the end of the service.

@@ -8,8 +8,8 @@
 #include <cstdlib>
 #include <span>
 
-#include "foundation/file_io.h"
 #include "foundation/format.h"
+#include "foundation/secret_file.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/secret_file.h"
 
@@ -26,13 +26,15 @@ Passphrase::~Passphrase() {
 
 void Passphrase::read(const std::string& place) {
     const std::string path = pathOfPassphrase(place);
-    const foundation::FileDescriptor file = openSecret(path);
+    const auto file = secretOf(foundation::openSecret(path));
     struct stat status {};
-    if (::fstat(file.get(), &status) != 0) failToReadSecret(path, errno);
+    if (::fstat(file.get(), &status) != 0)
+        throw Failure(EX_NOINPUT, foundation::Error::posix(errno, path).localizedDescription());
     if (!S_ISREG(status.st_mode)) {
         throw Failure(EX_CONFIG, foundation::format("the passphrase file %@ is no regular file", path));
     }
-    const std::size_t length = readSecret(file, path, std::as_writable_bytes(std::span(text_)));
+    const std::size_t length =
+        secretOf(foundation::readSecret(file, path, std::as_writable_bytes(std::span(text_))));
     const auto* const end =
         std::find(text_.begin(), text_.begin() + static_cast<std::ptrdiff_t>(length), '\n');
     length_ = static_cast<std::size_t>(end - text_.begin());

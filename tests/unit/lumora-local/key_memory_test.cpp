@@ -19,12 +19,13 @@
 #include "lumora-local/ticket_maker.h"
 #include "lumora-local/tls_context.h"
 #include "support/temporary_directory.h"
+#include "trust/openssl_memory.h"
 
 namespace pinwell::lumora {
 namespace {
 
 // Before main, as nothing has used the library by then.
-const bool wipes = wipeWhatOpenSSLFrees();
+const bool wipes = trust::wipeWhatOpenSSLFrees();
 
 // A text that is looked for, kept so that the search does not find its own copy.
 using Needle = std::vector<std::uint8_t>;
