@@ -4,6 +4,8 @@
 #include <openssl/x509.h>
 #include <openssl/x509_vfy.h>
 
+#include <algorithm>
+#include <array>
 #include <exception>
 #include <memory>
 #include <optional>
@@ -71,8 +73,11 @@ void messageThunk(int isWritten, int, int contentType, const void* bytes, std::s
     const auto* const octets = static_cast<const unsigned char*>(bytes);
     if (contentType == SSL3_RT_HEADER && length == SSL3_RT_HEADER_LENGTH)
         trust.noteRecord(length + (std::size_t{octets[3]} << 8U) + octets[4]);
-    if (contentType == SSL3_RT_ALERT && length == 2 && octets[1] == SSL_AD_CLOSE_NOTIFY)
+    if (contentType != SSL3_RT_ALERT || length != 2) return;
+    if (octets[1] == SSL_AD_CLOSE_NOTIFY)
         trust.noteOrderlyEnd();
+    else
+        trust.noteAlert(octets[1]);
 }
 
 void freeShare(void*, void* share, CRYPTO_EX_DATA*, int, long, void*) {
@@ -108,6 +113,22 @@ std::shared_ptr<ServerTrust> ServerTrust::install(void* context, Judge judge) no
     SSL_CTX_set_keylog_callback(tls,
                                 nullptr);  // the environment could have asked for the keys to be written out
     return SSL_CTX_set_min_proto_version(tls, TLS1_2_VERSION) == 1 ? trust : nullptr;
+}
+
+// RFC 8446, section 6.2: the alerts that are about the certificate of the other side.
+void ServerTrust::noteAlert(int description) noexcept {
+    constexpr std::array kOfCertificates{SSL_AD_BAD_CERTIFICATE,     SSL_AD_UNSUPPORTED_CERTIFICATE,
+                                         SSL_AD_CERTIFICATE_REVOKED, SSL_AD_CERTIFICATE_EXPIRED,
+                                         SSL_AD_CERTIFICATE_UNKNOWN, SSL_AD_UNKNOWN_CA,
+                                         SSL_AD_ACCESS_DENIED,       TLS13_AD_CERTIFICATE_REQUIRED};
+    if (std::find(kOfCertificates.begin(), kOfCertificates.end(), description) == kOfCertificates.end())
+        return;
+    try {
+        objection_ = SSL_alert_desc_string_long(description);
+        if (description == TLS13_AD_CERTIFICATE_REQUIRED) objection_ = "certificate required";
+    } catch (const std::exception&) {
+        objection_.clear();  // the caller is C
+    }
 }
 
 bool ServerTrust::verify(void* storeContext) noexcept {

@@ -8,6 +8,7 @@
 
 #include <functional>
 #include <memory>
+#include <string>
 #include <vector>
 
 #include "foundation/bytes.h"
@@ -41,6 +42,11 @@ class ServerTrust {
     bool sawOrderlyEnd() const noexcept { return sawOrderlyEnd_; }
     void noteOrderlyEnd() noexcept { sawOrderlyEnd_ = true; }
 
+    /// What the server has against this client, in the TLS library's words ("unknown CA"): the alert about a
+    /// client's certificate that it sent. Empty if it sent none.
+    const std::string& objection() const noexcept { return objection_; }
+    void noteAlert(int description) noexcept;
+
     /// How many bytes of TLS records have come since the judge was asked.
     std::size_t bytesArrived() const noexcept { return bytesArrived_; }
     void noteRecord(std::size_t length) noexcept { bytesArrived_ += length; }
@@ -57,6 +63,7 @@ class ServerTrust {
     bool refused_ = false;
     bool sawOrderlyEnd_ = false;
     bool agreedOnHTTP2_ = false;
+    std::string objection_;
     std::size_t bytesArrived_ = 0;
 };
 

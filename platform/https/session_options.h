@@ -5,6 +5,7 @@
 #include <functional>
 #include <memory>
 
+#include "https/client_identity.h"
 #include "https/session.h"
 
 namespace pinwell::https {
@@ -37,6 +38,10 @@ struct SessionOptions {
     /// For how long at most: without an exchange, and in all.
     std::chrono::seconds keepsIdleConnectionFor{60};
     std::chrono::seconds keepsConnectionFor{300};
+
+    /// Shown to every server that the delegate has accepted and that asks for it: whoever sets it should not
+    /// follow redirects. Null: none.
+    std::shared_ptr<const ClientIdentity> identity = nullptr;
 
     /// Where downloads are kept; when empty, the user's temporary directory.
     std::function<URL()> temporaryDirectory = {};

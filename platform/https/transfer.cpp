@@ -242,6 +242,13 @@ class Exchange {
     }
 
     void failFrom(CURLcode result) {
+        if (isAccepted() && !trust()->objection().empty()) {
+            fail(URLErrorCode::secureConnectionFailed,
+                 context_.options.identity
+                     ? "the server does not accept this client's certificate (" + trust()->objection() + ")"
+                     : "the server asks for a certificate (" + trust()->objection() + ")");
+            return;
+        }
         const TransferFailure& failure = failureOf(result);
         long proxyStatus = 0;
         curl_easy_getinfo(easy_.get(), CURLINFO_HTTP_CONNECTCODE, &proxyStatus);
@@ -283,7 +290,8 @@ class Exchange {
         const bool isStrict = exchange.context_.connection.prepare(
             context,
             [&exchange](const std::vector<Data>& certificates) { return exchange.judge(certificates); });
-        return isStrict ? CURLE_OK : CURLE_SSL_CONNECT_ERROR;
+        const auto& identity = exchange.context_.options.identity;
+        return isStrict && (!identity || identity->install(context)) ? CURLE_OK : CURLE_SSL_CONNECT_ERROR;
     }
 
     static int onConnected(void* self, char*, char*, int, int localPort) noexcept {

@@ -71,6 +71,21 @@ void useIdentity(SSL_CTX* context, const ServerIdentity& identity) {
     require(key && SSL_CTX_use_PrivateKey(context, key.get()) == 1, "the private key cannot be used");
 }
 
+void requireClients(SSL_CTX* context, const std::string& authority) {
+    const MemoryBio text = bioOf(authority);
+    const CertificateHandle root(PEM_read_bio_X509(text.get(), nullptr, nullptr, nullptr));
+    require(root && X509_STORE_add_cert(SSL_CTX_get_cert_store(context), root.get()) == 1,
+            "the clients' authority cannot be used");
+    SSL_CTX_set_verify(context, SSL_VERIFY_PEER | SSL_VERIFY_FAIL_IF_NO_PEER_CERT, nullptr);
+}
+
+std::string commonNameOf(const X509* certificate) {
+    std::array<char, 256> name{};
+    const int length = X509_NAME_get_text_by_NID(X509_get_subject_name(certificate), NID_commonName,
+                                                 name.data(), static_cast<int>(name.size()));
+    return length > 0 ? name.data() : "";
+}
+
 // Notes what the client offers and answers with what the options say (`argument`), offered or not.
 int chooseProtocol(SSL* connection, const unsigned char** chosen, unsigned char* chosenLength,
                    const unsigned char* offered, unsigned int offeredLength, void* argument) {
@@ -368,6 +383,7 @@ class ScriptRun {
             record.serverName = name;
         const CertificateHandle peer(SSL_get1_peer_certificate(connection_.get()));
         record.presentedClientCertificate = peer != nullptr;
+        if (peer) record.clientName = commonNameOf(peer.get());
         const std::lock_guard lock(server_.mutex);
         server_.connections[index_] = std::move(record);
         return handshakeDone_;
@@ -612,6 +628,7 @@ HostileServer::HostileServer(const ServerIdentity& identity, HostileServerOption
         SSL_CTX_set_cert_verify_callback(
             context, [](X509_STORE_CTX*, void*) { return 1; }, nullptr);
     }
+    if (!impl_->options.clientAuthority.empty()) requireClients(context, impl_->options.clientAuthority);
     SSL_CTX_set_alpn_select_cb(context, chooseProtocol, &impl_->protocol);
 
     impl_->listener = listenOn(impl_->options.address, impl_->port);

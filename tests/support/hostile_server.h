@@ -146,6 +146,8 @@ struct HostileServerOptions {
     TLSVersion minimum = TLSVersion::tls12;
     TLSVersion maximum = TLSVersion::tls13;
     bool requestsClientCertificate = false;  // asks for one; takes none for an answer
+    /// In PEM: asks for a certificate that this authority has issued, and ends the handshake without one.
+    std::string clientAuthority = {};
     /// Chosen in the handshake even when the client did not offer it; empty: no answer to ALPN.
     std::string applicationProtocol = "http/1.1";
     bool offersSessionTickets = true;
@@ -160,6 +162,7 @@ struct RecordedConnection {
     std::string version;                        // "TLSv1.3"
     bool sessionReused = false;
     bool presentedClientCertificate = false;
+    std::string clientName;  // the common name in it
     bool ended = false;
 };
 

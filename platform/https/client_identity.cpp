@@ -1,0 +1,136 @@
+#include "https/client_identity.h"
+
+#include <openssl/err.h>
+#include <openssl/pem.h>
+#include <openssl/ssl.h>
+#include <openssl/x509.h>
+
+#include "foundation/bytes.h"
+#include "foundation/file_io.h"
+#include "foundation/format.h"
+#include "foundation/handle.h"
+#include "foundation/secret_file.h"
+#include "https/server_trust.h"
+#include "trust/pem.h"
+
+namespace pinwell::https {
+namespace {
+
+using foundation::Error;
+using foundation::Result;
+
+using BioHandle = foundation::Handle<BIO, BIO_free>;
+using CertificateHandle = foundation::Handle<X509, X509_free>;
+using ContextHandle = foundation::Handle<SSL_CTX, SSL_CTX_free>;
+using KeyHandle = foundation::Handle<EVP_PKEY, EVP_PKEY_free>;
+
+struct FreeList {
+    void operator()(STACK_OF(X509) * list) const noexcept { sk_X509_pop_free(list, X509_free); }
+};
+using ListHandle = std::unique_ptr<STACK_OF(X509), FreeList>;
+
+// Whatever OpenSSL has to say of the files is said in our words; nothing stays in the thread's queue.
+struct QuietErrors {
+    QuietErrors() { ERR_set_mark(); }
+    ~QuietErrors() { ERR_pop_to_mark(); }
+    QuietErrors(const QuietErrors&) = delete;
+    QuietErrors& operator=(const QuietErrors&) = delete;
+};
+
+Error wrongFile(std::string text) {
+    return {foundation::kDataErrorDomain, foundation::kMalformedDocument, std::move(text)};
+}
+
+CertificateHandle certificateOf(const foundation::Data& der) {
+    const auto* bytes = static_cast<const unsigned char*>(static_cast<const void*>(der.data()));
+    const unsigned char* const end = bytes + der.size();
+    CertificateHandle certificate(d2i_X509(nullptr, &bytes, static_cast<long>(der.size())));
+    return bytes == end ? std::move(certificate) : nullptr;
+}
+
+// Asked only for an encrypted key, before anything is made of it.
+int refusePassphrase(char*, int, int, void* asked) {
+    *static_cast<bool*>(asked) = true;
+    return -1;
+}
+
+Result<KeyHandle> readKey(const std::string& path) {
+    foundation::WipedRoom<kMaximumIdentityKey + 1> room;
+    const auto length = foundation::readSecretFile(path, room.bytes());
+    if (!length) return length.error();
+    const BioHandle pem(BIO_new_mem_buf(room.bytes().data(), static_cast<int>(*length)));
+    bool isEncrypted = false;
+    KeyHandle key(PEM_read_bio_PrivateKey(pem.get(), nullptr, refusePassphrase, &isEncrypted));
+    if (isEncrypted)
+        return wrongFile(
+            foundation::format("The key in %@ is encrypted. Keys are taken unencrypted only.", path));
+    if (!key) return wrongFile(foundation::format("There is no private key in %@ that can be read.", path));
+    return key;
+}
+
+struct Certificates {
+    CertificateHandle own;
+    ListHandle issuers;
+};
+
+Result<Certificates> readCertificates(const std::string& path) {
+    const auto contents = foundation::readSmallFile(path, kMaximumIdentityCertificates);
+    if (!contents) return contents.error();
+    const std::string text = foundation::toString(*contents);
+    Certificates certificates{nullptr, ListHandle(sk_X509_new_null())};
+    std::size_t count = 0;
+    for (const trust::PemBlock& block : trust::readPemBlocks(text)) {
+        if (!trust::isCertificateBlock(block)) continue;
+        CertificateHandle certificate = block.data ? certificateOf(*block.data) : nullptr;
+        if (!certificate)
+            return wrongFile(
+                foundation::format("The certificate in line %zu of %@ cannot be read.", block.line, path));
+        if (++count > kMaximumPeerCertificates)
+            return wrongFile(foundation::format("There are more than %zu certificates in %@.",
+                                                kMaximumPeerCertificates, path));
+        if (!certificates.own)
+            certificates.own = std::move(certificate);
+        else if (sk_X509_push(certificates.issuers.get(), certificate.get()) > 0)
+            static_cast<void>(certificate.release());  // the list has it
+    }
+    if (!certificates.own) return wrongFile(foundation::format("There is no certificate in %@.", path));
+    return certificates;
+}
+
+}  // namespace
+
+struct ClientIdentity::Parts {
+    Certificates certificates;
+    KeyHandle key;
+};
+
+ClientIdentity::ClientIdentity() : parts_(std::make_unique<Parts>()) {}
+ClientIdentity::~ClientIdentity() = default;
+
+Result<std::shared_ptr<const ClientIdentity>> ClientIdentity::read(const std::string& certificatePath,
+                                                                   const std::string& keyPath) {
+    const QuietErrors quiet;
+    auto certificates = readCertificates(certificatePath);
+    if (!certificates) return certificates.error();
+    auto key = readKey(keyPath);
+    if (!key) return key.error();
+    if (X509_check_private_key(certificates->own.get(), key->get()) != 1)
+        return wrongFile(foundation::format("The key in %@ is not that of the first certificate in %@.",
+                                            keyPath, certificatePath));
+    auto identity = std::make_shared<ClientIdentity>();
+    *identity->parts_ = {*std::move(certificates), *std::move(key)};
+    const ContextHandle trial(SSL_CTX_new(TLS_client_method()));
+    if (!trial || !identity->install(trial.get()))
+        return wrongFile(foundation::format(
+            "TLS does not take the certificate in %@ with the key in %@. They may be too weak.",
+            certificatePath, keyPath));
+    return std::shared_ptr<const ClientIdentity>(std::move(identity));
+}
+
+bool ClientIdentity::install(void* context) const noexcept {
+    const QuietErrors quiet;
+    return SSL_CTX_use_cert_and_key(static_cast<SSL_CTX*>(context), parts_->certificates.own.get(),
+                                    parts_->key.get(), parts_->certificates.issuers.get(), 1) == 1;
+}
+
+}  // namespace pinwell::https
