@@ -138,8 +138,8 @@ TEST_P(Volumes, KeepWhatAnArtefactIsBesidesItsContents) {
 }
 
 TEST_P(Volumes, DateAnArtefactFromItsStapling) {
-    constexpr timespec kLongAgo{1'000'000'000, 0};
-    const std::array<timespec, 2> times{kLongAgo, kLongAgo};
+    constexpr timespec kOldTime{1'000'000'000, 0};
+    const std::array<timespec, 2> times{kOldTime, kOldTime};
     ASSERT_EQ(utimensat(AT_FDCWD, artefact.file().c_str(), times.data(), 0), 0);
     writeFile(volume / "earlier", "x");
 

@@ -6,6 +6,7 @@
 
 #include <array>
 #include <cstdint>
+#include <cstring>
 #include <fstream>
 #include <sstream>
 #include <string>
@@ -74,10 +75,16 @@ bool isAt(const std::uint8_t* memory, const Needle& needle) {
 }
 
 std::size_t timesIn(std::uintptr_t begin, std::uintptr_t end, const Needle& needle) {
-    const auto* const memory = reinterpret_cast<const std::uint8_t*>(begin);
+    const auto* memory = reinterpret_cast<const std::uint8_t*>(begin);
+    const auto* const past = reinterpret_cast<const std::uint8_t*>(end) - needle.size() + 1;
     std::size_t found = 0;
-    for (std::size_t i = 0; i + needle.size() <= end - begin; ++i)
-        if (memory[i] == hidden(needle[0]) && isAt(memory + i, needle)) ++found;
+    while (memory < past) {
+        memory = static_cast<const std::uint8_t*>(
+            std::memchr(memory, hidden(needle[0]), static_cast<std::size_t>(past - memory)));
+        if (memory == nullptr) break;
+        if (isAt(memory, needle)) ++found;
+        ++memory;
+    }
     return found;
 }
 
