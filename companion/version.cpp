@@ -13,4 +13,8 @@ std::string versionText(std::string_view program) {
                               curl_version_info(CURLVERSION_NOW)->version);
 }
 
+std::string versionNumber() {
+    return PINWELL_VERSION;
+}
+
 }  // namespace pinwell::companion

@@ -10,4 +10,7 @@ namespace pinwell::companion {
 /// process runs with. Without a line end.
 std::string versionText(std::string_view program);
 
+/// "34.0"
+std::string versionNumber();
+
 }  // namespace pinwell::companion

@@ -1,5 +1,7 @@
 #include "lumora-local/certificate_file.h"
 
+#include <ctime>
+
 #include "foundation/file_io.h"
 
 namespace pinwell::lumora {
@@ -36,6 +38,12 @@ std::string encodeCertificate(X509* certificate) {
     const BioHandle pem(BIO_new(BIO_s_mem()));
     require(pem != nullptr && PEM_write_bio_X509(pem.get(), certificate) == 1, "encode a certificate");
     return textOf(pem.get());
+}
+
+std::int64_t expiryOf(X509* certificate) {
+    std::tm time{};
+    if (ASN1_TIME_to_tm(X509_get0_notAfter(certificate), &time) != 1) return 0;
+    return std::int64_t{::timegm(&time)};
 }
 
 std::string nameOf(X509* certificate) {

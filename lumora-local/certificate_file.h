@@ -1,6 +1,7 @@
 // Certificates in PEM files. Includes OpenSSL's headers: for .cpp files of this folder.
 #pragma once
 
+#include <cstdint>
 #include <string>
 #include <vector>
 
@@ -16,6 +17,9 @@ CertificateHandle readCertificateFile(const std::string& path);
 std::vector<CertificateHandle> readCertificateFiles(const std::string& path, std::size_t limit);
 
 std::string encodeCertificate(X509* certificate);
+
+/// Seconds since 1970. A certificate without a date that can be read has expired: 0.
+std::int64_t expiryOf(X509* certificate);
 
 /// The subject's common name, for messages; the whole subject if it has none.
 std::string nameOf(X509* certificate);

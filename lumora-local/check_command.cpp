@@ -26,13 +26,6 @@ using foundation::format;
 constexpr std::int64_t kHour = 3600;
 constexpr std::int64_t kCentury = std::int64_t{36525} * 24 * kHour;
 
-/// Seconds since 1970. Certificates without a date that can be read have expired.
-std::int64_t expiryOf(X509* certificate) {
-    std::tm time{};
-    if (ASN1_TIME_to_tm(X509_get0_notAfter(certificate), &time) != 1) return 0;
-    return std::int64_t{::timegm(&time)};
-}
-
 class Inspection {
   public:
     Inspection(const ServiceDirectory& directory, Date now, std::int64_t warning)

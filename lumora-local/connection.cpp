@@ -33,7 +33,8 @@ constexpr std::size_t kFramingAllowance = 256 * 1024;
 // How long a closing connection is read on: closing at once would make the kernel reset it and take the
 // answer back that the peer has yet to read.
 constexpr milliseconds kFarewellTime{5'000};
-constexpr milliseconds kFarewellTimeWhenStopping{500};  // a service that is to end does not wait for idle clients
+constexpr milliseconds kFarewellTimeWhenStopping{
+    500};  // a service that is to end does not wait for idle clients
 constexpr std::size_t kFarewellBytes = 4 * 1024 * 1024;
 
 constexpr std::size_t kReadSize = 16 * 1024;
@@ -67,7 +68,10 @@ Connection::Connection(ConnectionContext& context, Tcp::socket socket, std::shar
       buffer_(context.limits.headBytes + kReadSize) {}
 
 Connection::~Connection() {
-    if (identifier_ != 0) context_.table.leave(identifier_);
+    if (identifier_ == 0) return;
+    context_.table.leave(identifier_);
+    if (!established_) context_.counts.handshakeFailed();
+    context_.counts.connectionClosed();
 }
 
 Tcp::socket& Connection::socket() {
@@ -85,7 +89,9 @@ void Connection::start() {
             asio::post(self->socket().get_executor(), [self] { self->endIfSilent(); });
         }
     });
-    if (identifier_ == 0 || context_.stopping) return;
+    if (identifier_ == 0) return context_.counts.connectionRefused();
+    context_.counts.connectionAccepted();
+    if (context_.stopping) return;
     limitTime(context_.limits.handshakeTime);
     plain_->async_wait(Tcp::socket::wait_read, [self = shared_from_this()](ErrorCode failure) {
         if (!failure && self->phase_ != Phase::closing) self->handshake();
@@ -178,6 +184,7 @@ std::optional<Answer> Connection::guarded(Work&& work) {
         return work();
     } catch (const std::exception& error) {
         context_.errorLog(format("cannot answer a request: %s", error.what()));
+        context_.counts.storeFailed();
         return refusalForNow("The records cannot be read at the moment");
     }
 }
@@ -210,6 +217,15 @@ void Connection::onBody() {
             false);
 }
 
+void Connection::count(const Answer& answer) const {
+    const auto target = headSeen_ ? parser_->get().target() : boost::beast::string_view();
+    context_.counts.requestAnswered(
+        headSeen_ ? kindOfTarget({target.data(), target.size()}) : RequestKind::unreadable, answer.status,
+        std::chrono::duration_cast<std::chrono::microseconds>(std::chrono::steady_clock::now() - begun_));
+    context_.counts.recordsAnswered(answer.recordsFound, answer.records.size() - answer.recordsFound,
+                                    answer.recordsFromMemory);
+}
+
 void Connection::log(const Answer& answer, std::size_t size, const std::string& identifier) const {
     RequestEntry entry;
     entry.time = foundation::Date::now();
@@ -240,6 +256,7 @@ void Connection::respond(const Answer& answer, bool bodyLeftBehind) {
     const auto done = [self = shared_from_this()](ErrorCode error, std::size_t) { self->onWritten(error); };
 
     const std::size_t size = answer.asset ? answer.asset->size() : answer.body.size();
+    count(answer);
     log(answer, size, identifier);
     if (answer.asset && !withoutBody) {
         asset_ = answer.asset;

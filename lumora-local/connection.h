@@ -35,6 +35,7 @@ struct ConnectionContext {
     LogForm logForm;
     ConnectionTable& table;
     const std::atomic<bool>& stopping;
+    ServiceCounts& counts;
 };
 
 class Connection : public std::enable_shared_from_this<Connection> {
@@ -68,6 +69,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
     void onBody();
     void refuseUnreadable(ErrorCode error);
     void respond(const Answer& answer, bool bodyLeftBehind);
+    void count(const Answer& answer) const;
     void log(const Answer& answer, std::size_t size, const std::string& identifier) const;
     void onWritten(ErrorCode error);
     void close(bool unread);

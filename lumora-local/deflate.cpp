@@ -10,7 +10,7 @@ namespace {
 using foundation::ByteView;
 using foundation::Data;
 
-const Bytef* octets(ByteView bytes) {
+const Bytef* zlibBytes(ByteView bytes) {
     return reinterpret_cast<const Bytef*>(bytes.data());
 }
 
@@ -19,7 +19,7 @@ const Bytef* octets(ByteView bytes) {
 Data deflated(ByteView contents) {
     uLongf length = compressBound(contents.size());
     Data stream(length);
-    const int status = compress2(reinterpret_cast<Bytef*>(stream.data()), &length, octets(contents),
+    const int status = compress2(reinterpret_cast<Bytef*>(stream.data()), &length, zlibBytes(contents),
                                  contents.size(), Z_BEST_COMPRESSION);
     if (status != Z_OK) throw Failure(EX_SOFTWARE, "cannot compress");
     stream.resize(length);
@@ -27,7 +27,7 @@ Data deflated(ByteView contents) {
 }
 
 std::uint32_t crc32(ByteView bytes) {
-    return static_cast<std::uint32_t>(::crc32_z(0, octets(bytes), bytes.size()));
+    return static_cast<std::uint32_t>(::crc32_z(0, zlibBytes(bytes), bytes.size()));
 }
 
 }  // namespace pinwell::lumora

@@ -11,6 +11,9 @@ namespace pinwell::lumora {
 /// The port that `init` writes unless it is told another.
 inline constexpr std::uint16_t kDefaultPort = 8443;
 
+/// The port of metrics unless another is asked for.
+inline constexpr std::uint16_t kDefaultMetricsPort = 9464;
+
 /// The port that an https address without a port means.
 inline constexpr std::uint16_t kHttpsPort = 443;
 

@@ -150,6 +150,14 @@ Answer refusalForNow(std::string_view reason) {
     return answer;
 }
 
+RequestKind kindOfTarget(std::string_view target) {
+    const std::string_view path = pathOf(target);
+    if (path == kHealthPath) return RequestKind::health;
+    if (path == kReadyPath) return RequestKind::readiness;
+    if (path.starts_with(kAssetPrefix)) return RequestKind::asset;
+    return environmentOfLookup(path) ? RequestKind::lookup : RequestKind::other;
+}
+
 std::optional<Answer> LookupService::answerHead(const RequestHead& head) const {
     const std::string_view path = pathOf(head.target);
     const bool reading = head.method == "GET" || head.method == "HEAD";
@@ -176,6 +184,7 @@ Answer LookupService::answerLookup(const RequestHead& head, std::string_view bod
         if (const auto known = answers_.find(*state, *environment, body)) {
             answer.body = known->text;
             answer.records = known->names;
+            answer.recordsFound = answer.recordsFromMemory = known->names.size();
             return answer;
         }
     }
@@ -199,7 +208,10 @@ Answer LookupService::answerLookup(const RequestHead& head, std::string_view bod
     std::string_view separator;
     for (const std::string& name : request.names) {
         answer.body += separator;
-        answer.body += found.at(name).record->text;
+        const Found& entry = found.at(name);
+        answer.body += entry.record->text;
+        answer.recordsFound += entry.isKnown ? 1U : 0U;
+        answer.recordsFromMemory += entry.fromMemory ? 1U : 0U;
         separator = ",";
     }
     answer.body += kEnd;
@@ -217,7 +229,8 @@ LookupService::Found LookupService::findRecord(const RequestHead& head, Environm
                                                const std::string& name,
                                                std::optional<std::uint64_t> state) const {
     if (state) {
-        if (auto known = records_.find(*state, environment, name)) return {std::move(known), true};
+        if (auto known = records_.find(*state, environment, name))
+            return {std::move(known), true, true, true};
     }
     const auto share = [](const Value& record) {
         return std::make_shared<const KeptAnswer>(KeptAnswer{json(record)});
@@ -227,12 +240,12 @@ LookupService::Found LookupService::findRecord(const RequestHead& head, Environm
         auto record = share(
             foundRecord(name, "signedTicket", "BYTES", foundation::encodeBase64(*delivery->inlineTicket)));
         if (state) records_.insert(*state, environment, name, record);
-        return {std::move(record), true};
+        return {std::move(record), true, true};
     }
     if (delivery && delivery->asset) {
         Dictionary asset{{"downloadURL", assetUrlTemplate(head, delivery->asset->identifier)},
                          {"size", delivery->asset->size}};
-        return {share(foundRecord(name, "signedTicketAsset", "ASSET", std::move(asset))), false};
+        return {share(foundRecord(name, "signedTicketAsset", "ASSET", std::move(asset))), false, true};
     }
     return {share(missingRecord(name)), false};
 }

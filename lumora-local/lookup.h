@@ -28,6 +28,7 @@
 #include "lumora-local/answer_cache.h"
 #include "lumora-local/endpoint.h"
 #include "lumora-local/record_store.h"
+#include "lumora-local/service_counts.h"
 
 namespace pinwell::lumora {
 
@@ -56,7 +57,9 @@ struct Answer {
     std::shared_ptr<const foundation::Data>
         asset;  // in the place of `body`; downloads of one ticket share it
     std::vector<std::pair<std::string, std::string>> headers;
-    std::vector<std::string> records;  // the names that were looked up, for the log
+    std::vector<std::string> records;   // the names that were looked up, for the log
+    std::size_t recordsFound = 0;       // of them
+    std::size_t recordsFromMemory = 0;  // of those found
 };
 
 /// A refusal in the form that all refusals have.
@@ -68,6 +71,9 @@ Answer refusalForNow(std::string_view reason);
 /// Says why the service cannot do all of its work although the records can be read; `nullopt` if it can. From
 /// any thread.
 using Obstacle = std::function<std::optional<std::string>()>;
+
+/// For counting. Says nothing about what the answer will be.
+RequestKind kindOfTarget(std::string_view target);
 
 class LookupService {
   public:
@@ -91,6 +97,8 @@ class LookupService {
     struct Found {
         std::shared_ptr<const KeptAnswer> record;
         bool isForAll = false;  // whoever asks gets the same
+        bool isKnown = false;
+        bool fromMemory = false;
     };
     Found findRecord(const RequestHead& head, Environment environment, const std::string& name,
                      std::optional<std::uint64_t> state) const;

@@ -63,6 +63,7 @@ struct Arguments {
     std::string to;
     std::string listen;
     std::string readyFile;
+    std::string metricsListen;
     bool updatePlatform = false;
 };
 
@@ -231,6 +232,13 @@ void runServe(const Arguments& arguments) {
     }
     if (!arguments.readyFile.empty()) options.readyFile = arguments.readyFile;
     options.updatePlatform = arguments.updatePlatform;
+    options.version = companion::versionNumber();
+    if (!arguments.metricsListen.empty()) {
+        options.metricsListen = parseEndpoint(arguments.metricsListen, kDefaultMetricsPort);
+        if (!options.metricsListen) {
+            throw Failure(EX_USAGE, foundation::format("%@ is not ADDRESS:PORT", arguments.metricsListen));
+        }
+    }
 
     const ServeSignals signals = catchServeSignals();
     std::mutex mutex;
@@ -346,6 +354,8 @@ void declareCommands(CLI::App& app, Arguments& arguments) {
         add("serve", "Answer lookups over HTTPS until SIGTERM or SIGINT", kServiceHelp, runServe);
     serve->add_option("--listen", arguments.listen,
                       "ADDRESS:PORT instead of what platform.json says; port 0: any free one");
+    serve->add_option("--metrics-listen", arguments.metricsListen,
+                      "ADDRESS:PORT for metrics over plain HTTP, for Prometheus (default: none)");
     serve->add_option("--ready-file", arguments.readyFile, "Gets the service's URL once it listens");
     serve->add_flag("--update-platform", arguments.updatePlatform,
                     "Let platform.json name this very service");

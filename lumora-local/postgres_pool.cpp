@@ -44,7 +44,11 @@ PostgresPool::Lease PostgresPool::take(Deadline deadline) {
 std::unique_ptr<PostgresConnection> PostgresPool::open(Deadline deadline) {
     const Deadline begin = Clock::now();
     try {
-        return std::make_unique<PostgresConnection>(url_, std::min(deadline, begin + kConnectTime), user_);
+        auto connection =
+            std::make_unique<PostgresConnection>(url_, std::min(deadline, begin + kConnectTime), user_);
+        const std::lock_guard lock(mutex_);
+        ++opened_;
+        return connection;
     } catch (const PostgresError& error) {
         {
             const std::lock_guard lock(mutex_);
@@ -66,6 +70,11 @@ void PostgresPool::giveBack(std::unique_ptr<PostgresConnection> connection) noex
         if (connection != nullptr) idle_.push_back(std::move(connection));
     }
     freed_.notify_one();
+}
+
+std::uint64_t PostgresPool::opened() const {
+    const std::lock_guard lock(mutex_);
+    return opened_;
 }
 
 void PostgresPool::closeIdle() {

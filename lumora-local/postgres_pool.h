@@ -47,6 +47,9 @@ class PostgresPool {
     /// Closes the connections that nobody uses: after one of them turned out to be broken, all may be.
     void closeIdle();
 
+    /// How many connections were made so far.
+    std::uint64_t opened() const;
+
   private:
     std::unique_ptr<PostgresConnection> open(Deadline deadline);
     void giveBack(std::unique_ptr<PostgresConnection> connection) noexcept;
@@ -54,10 +57,11 @@ class PostgresPool {
     const std::string url_;
     const std::string user_;
     const std::size_t maximum_;
-    std::mutex mutex_;
+    mutable std::mutex mutex_;
     std::condition_variable freed_;
     std::vector<std::unique_ptr<PostgresConnection>> idle_;
     std::size_t inUse_ = 0;
+    std::uint64_t opened_ = 0;
     Deadline notBefore_{};  // of the next attempt to connect
     std::string lastFailure_;
 };

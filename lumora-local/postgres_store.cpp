@@ -372,6 +372,16 @@ bool PostgresStore::wasCommitted(const std::string& eventHash, Deadline deadline
     }
 }
 
+StoreFacts PostgresStore::facts() {
+    const auto [records, events] = reading([](PostgresConnection& connection, Deadline deadline) {
+        // Events are never removed, so the last one's position is their number.
+        const PostgresRows rows = connection.query(
+            "SELECT records, (SELECT coalesce(max(position), 0) FROM event) FROM store", {}, deadline);
+        return std::pair(rows.integer(0, 0), rows.integer(0, 1));
+    });
+    return {static_cast<std::uint64_t>(records), static_cast<std::uint64_t>(events), pool_.opened()};
+}
+
 std::optional<Record> PostgresStore::find(Environment environment, const std::string& recordName) {
     if (!canNameARecord(recordName)) return std::nullopt;
     static const std::string sql = std::string("SELECT ") + kPostgresRecordColumns +

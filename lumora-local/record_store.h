@@ -47,6 +47,13 @@ class RecordSource {
     virtual std::optional<std::uint64_t> changeCounter() { return std::nullopt; }
 };
 
+/// What a store tells of itself, for metrics.
+struct StoreFacts {
+    std::uint64_t records = 0;
+    std::uint64_t events = 0;
+    std::optional<std::uint64_t> connectionsMade;  // to a database, since the store was opened
+};
+
 /// One record with all that is known of it except the ticket.
 struct Record {
     std::string name;
@@ -115,6 +122,9 @@ class RecordStore : public RecordSource {
     /// this returns, the change survives a crash.
     virtual void put(Environment environment, const std::vector<SignedRecord>& records,
                      const Occasion& occasion) = 0;
+
+    /// Costs the same however much the store holds.
+    virtual StoreFacts facts() = 0;
 
     virtual std::optional<Record> find(Environment environment, const std::string& recordName) = 0;
 

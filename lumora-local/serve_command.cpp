@@ -9,10 +9,14 @@
 
 #include <algorithm>
 #include <initializer_list>
+#include <mutex>
 
 #include "foundation/format.h"
+#include "lumora-local/certificate_dates.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
+#include "lumora-local/metrics.h"
+#include "lumora-local/metrics_listener.h"
 #include "lumora-local/passphrase.h"
 #include "lumora-local/server.h"
 #include "lumora-local/service_manager.h"
@@ -117,10 +121,55 @@ TlsFiles tlsFilesOf(const ServiceDirectory& directory) {
             directory.settings().passphraseFile};
 }
 
+/// What the metrics are made of. Its functions may be called from any thread.
+class MetricsSource {
+  public:
+    MetricsSource(const ServiceDirectory& directory, const std::string& version, RecordStore& store)
+        : version_(version), store_(store), certificates_(certificateDates(directory)) {}
+
+    ServiceCounts& counts() noexcept { return counts_; }
+
+    /// A file that has gone out of reach keeps the date that is known of it.
+    void readCertificatesAgain(const ServiceDirectory& directory) {
+        std::vector<CertificateDate> dates = certificateDates(directory);
+        const std::lock_guard lock(mutex_);
+        for (CertificateDate& known : certificates_) {
+            const auto same = std::find_if(dates.begin(), dates.end(), [&](const CertificateDate& date) {
+                return date.role == known.role;
+            });
+            if (same != dates.end()) known = std::move(*same);
+        }
+    }
+
+    std::string text() {
+        ServiceFacts facts{version_, started_, {}, {}};
+        try {
+            facts.store = store_.facts();
+        } catch (const std::exception&) {
+            // The metrics say that the records cannot be read.
+        }
+        {
+            const std::lock_guard lock(mutex_);
+            facts.certificates = certificates_;
+        }
+        return describeMetrics(counts_.read(), facts);
+    }
+
+  private:
+    const std::string version_;
+    const foundation::Date started_ = foundation::Date::now();
+    RecordStore& store_;
+    ServiceCounts counts_;
+    std::mutex mutex_;
+    std::vector<CertificateDate> certificates_;
+};
+
 /// From the files that service.json names now, which may be others than before.
-void reload(const std::string& path, TlsContext& tls, const ServeOutput& output) {
+void reload(const std::string& path, TlsContext& tls, MetricsSource& metrics, const ServeOutput& output) {
     try {
-        tls.reload(tlsFilesOf(ServiceDirectory::open(path)));
+        const ServiceDirectory directory = ServiceDirectory::open(path);
+        tls.reload(tlsFilesOf(directory));
+        metrics.readCertificatesAgain(directory);
         output.out("read the certificate and the key again");
     } catch (const Failure& failure) {
         output.err(format("%s; the service goes on with the certificate that it has", failure.what()));
@@ -166,10 +215,16 @@ void serve(const ServiceDirectory& directory, const ServeOptions& options, const
     const ServeOutput output = inForm(directory.settings().log, lines);
     // A file that an earlier run left would tell of a service that is not there yet.
     if (options.readyFile) ::unlink(options.readyFile->c_str());
+    if (options.metricsListen) requireMetrics();
     TlsContext tls(tlsFilesOf(directory));
     const std::unique_ptr<RecordStore> store = openStore(directory);
     Listener listener(options.listen ? *options.listen : directory.advertisedEndpoint());
     const Endpoint endpoint = reachable(directory, listener.endpoint());
+    std::optional<Listener> metricsListener;
+    if (options.metricsListen) {
+        metricsListener.emplace(*options.metricsListen);
+        output.out(format("metrics at http://%@/metrics", toString(metricsListener->endpoint())));
+    }
     announce(directory, options, output, endpoint);
 
     const ServiceManager manager;
@@ -177,12 +232,15 @@ void serve(const ServiceDirectory& directory, const ServeOptions& options, const
     const LookupService lookups(*store, directory.hosts(), endpoint, fullDiskAt(directory.servicePath("")));
     ServerLimits limits;
     limits.connections = connectionsThatFit();
+    MetricsSource metrics(directory, options.version, *store);
     giveUpRights(directory, output);
-    Server server(lookups, tls, lines.out, output.err, limits, directory.settings().log);
+    std::optional<MetricsListener> scrapes;
+    if (metricsListener) scrapes.emplace(*metricsListener, [&metrics] { return metrics.text(); });
+    Server server(lookups, tls, lines.out, output.err, limits, directory.settings().log, &metrics.counts());
     const int hangUp = signals.reload.get();
-    std::vector<Watch> watches{{hangUp, [&directory, &tls, &output, hangUp] {
+    std::vector<Watch> watches{{hangUp, [&directory, &tls, &metrics, &output, hangUp] {
                                     takeSignals(hangUp);
-                                    reload(directory.path(), tls, output);
+                                    reload(directory.path(), tls, metrics, output);
                                 }}};
     if (const auto watch = run.watch()) watches.push_back(*watch);
     run.ready(endpoint);

@@ -13,7 +13,9 @@
 namespace pinwell::lumora {
 
 struct ServeOptions {
-    std::optional<Endpoint> listen;  // where platform.json sends clients, when absent
+    std::string version;                    // of the program, for its metrics
+    std::optional<Endpoint> metricsListen;  // no metrics, when absent
+    std::optional<Endpoint> listen;         // where platform.json sends clients, when absent
     std::optional<std::string>
         readyFile;                // gets one line, "https://ADDRESS:PORT", once connections are accepted
     bool updatePlatform = false;  // platform.json is rewritten to where the service really is

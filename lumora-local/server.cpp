@@ -1,7 +1,5 @@
 #include "lumora-local/server.h"
 
-#include <sys/socket.h>
-
 #include <algorithm>
 #include <atomic>
 #include <boost/asio/io_context.hpp>
@@ -16,6 +14,7 @@
 
 #include "foundation/format.h"
 #include "lumora-local/connection.h"
+#include "lumora-local/socket_protocol.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -26,13 +25,6 @@ using ErrorCode = boost::system::error_code;
 
 // After the system had no descriptor or no memory for a connection.
 constexpr std::chrono::milliseconds kPauseWhenShort{50};
-
-Tcp protocolOf(int socket) {
-    sockaddr_storage address{};
-    socklen_t length = sizeof address;
-    const bool known = ::getsockname(socket, reinterpret_cast<sockaddr*>(&address), &length) == 0;
-    return known && address.ss_family == AF_INET6 ? Tcp::v6() : Tcp::v4();
-}
 
 /// Accepts connections while there are places for them. Its own handlers run on one strand.
 class Acceptor {
@@ -156,19 +148,21 @@ void work(asio::io_context& context, const Server::LogLine& errorLog) {
 }  // namespace
 
 Server::Server(const LookupService& lookups, const TlsContext& context, LogLine accessLog, LogLine errorLog,
-               const ServerLimits& limits, LogForm form)
+               const ServerLimits& limits, LogForm form, ServiceCounts* counts)
     : lookups_(lookups),
       context_(context),
       accessLog_(std::move(accessLog)),
       errorLog_(std::move(errorLog)),
       limits_(limits),
-      form_(form) {}
+      form_(form),
+      counts_(counts != nullptr ? *counts : ownCounts_) {}
 
 void Server::run(Listener& listener, int stopDescriptor, const std::vector<Watch>& watches) {
     const std::size_t workers = workersFor(limits_);
     ConnectionTable table(limits_.connectionsPerAddress);
     std::atomic<bool> stopping{false};
-    ConnectionContext shared{lookups_, context_, accessLog_, errorLog_, limits_, form_, table, stopping};
+    ConnectionContext shared{lookups_, context_, accessLog_, errorLog_, limits_,
+                             form_,    table,    stopping,   counts_};
     asio::io_context context(static_cast<int>(workers));
 
     Acceptor acceptor(context, listener, shared);

@@ -9,6 +9,7 @@
 #include "lumora-local/access_log.h"
 #include "lumora-local/listener.h"
 #include "lumora-local/lookup.h"
+#include "lumora-local/service_counts.h"
 #include "lumora-local/tls_context.h"
 
 namespace pinwell::lumora {
@@ -35,9 +36,10 @@ class Server {
     using LogLine = std::function<void(std::string_view)>;
 
     /// References must outlive the server. `accessLog` gets one line per request, `errorLog` one for each
-    /// request that failed through our own fault; both come from any worker, several at a time.
+    /// request that failed through our own fault; both come from any worker, several at a time. What
+    /// happens is counted in `counts`, if it is there.
     Server(const LookupService& lookups, const TlsContext& context, LogLine accessLog, LogLine errorLog,
-           const ServerLimits& limits = {}, LogForm form = LogForm::text);
+           const ServerLimits& limits = {}, LogForm form = LogForm::text, ServiceCounts* counts = nullptr);
 
     /// Serves until `stopDescriptor` is readable (which nobody may undo), then refuses new connections, lets
     /// the requests that have begun finish, closes the silent connections, and returns. Takes the listener's
@@ -51,6 +53,8 @@ class Server {
     LogLine errorLog_;
     ServerLimits limits_;
     LogForm form_;
+    ServiceCounts ownCounts_;
+    ServiceCounts& counts_;
 };
 
 }  // namespace pinwell::lumora

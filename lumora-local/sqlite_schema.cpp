@@ -46,6 +46,17 @@ constexpr const char* kRecordTables = R"(
 // A store of version 2 may lack it, which costs time alone.
 constexpr const char* kHashIndex = "CREATE INDEX IF NOT EXISTS hash_by_bytes ON hash (environment, hash)";
 
+// How many records there are: counting ten million takes seconds. A store of version 2 may lack it, and then
+// gets it; programs that do not know of it count as well, for the triggers are the database's.
+constexpr const char* kRecordCount = R"(
+    CREATE TABLE record_count (records INTEGER NOT NULL);
+    INSERT INTO record_count (records) SELECT count(*) FROM record;
+    CREATE TRIGGER record_is_added AFTER INSERT ON record
+        BEGIN UPDATE record_count SET records = records + 1; END;
+    CREATE TRIGGER record_is_removed AFTER DELETE ON record
+        BEGIN UPDATE record_count SET records = records - 1; END;
+)";
+
 // Since version 2. The triggers stop mistakes; the chain of hashes shows intent.
 constexpr const char* kEventTable = R"(
     CREATE TABLE event (
@@ -132,15 +143,20 @@ void createSqliteSchema(SQLite::Database& database) {
     database.exec(kRecordTables);
     database.exec(kHashIndex);
     database.exec(kEventTable);
+    database.exec(kRecordCount);
     setVersion(database);
     transaction.commit();
 }
 
 void upgradeSqliteSchema(SQLite::Database& database, const std::string& path) {
-    if (versionOf(database) == kCurrentVersion) return;
+    if (versionOf(database) == kCurrentVersion && database.tableExists("record_count")) return;
     SQLite::Transaction transaction(database, SQLite::TransactionBehavior::IMMEDIATE);
     const int version = versionOf(database);  // another process may have been first
-    if (version == kCurrentVersion) return;
+    if (version == kCurrentVersion) {
+        if (!database.tableExists("record_count")) database.exec(kRecordCount);
+        transaction.commit();
+        return;
+    }
     if (version != 1) {
         throw Failure(EX_DATAERR,
                       format("%@: record store of version %d; this program knows versions 1 to %d", path,
@@ -149,6 +165,7 @@ void upgradeSqliteSchema(SQLite::Database& database, const std::string& path) {
     keepCopy(path, version);
     database.exec(kHashIndex);
     database.exec(kEventTable);
+    database.exec(kRecordCount);
     logExistingRecords(database);
     setVersion(database);
     transaction.commit();

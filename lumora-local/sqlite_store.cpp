@@ -246,7 +246,7 @@ std::optional<Data> SqliteStore::findAsset(const std::string& identifier) {
 
 std::size_t SqliteStore::countRecords() {
     return reading([&] {
-        return static_cast<std::size_t>(database_->execAndGet("SELECT count(*) FROM record").getInt64());
+        return static_cast<std::size_t>(database_->execAndGet("SELECT records FROM record_count").getInt64());
     });
 }
 
@@ -273,6 +273,17 @@ void SqliteStore::put(Environment environment, const std::vector<SignedRecord>& 
         }
         transaction.commit();
         ++changes_;
+    });
+}
+
+StoreFacts SqliteStore::facts() {
+    return reading([&] {
+        // Events are never removed, so the last one's position is their number.
+        SQLite::Statement row(
+            *database_, "SELECT records, (SELECT ifnull(max(position), 0) FROM event) FROM record_count");
+        row.executeStep();
+        return StoreFacts{static_cast<std::uint64_t>(row.getColumn(0).getInt64()),
+                          static_cast<std::uint64_t>(row.getColumn(1).getInt64()), std::nullopt};
     });
 }
 

@@ -35,6 +35,7 @@ class SqliteStore final : public RecordStore {
     std::optional<std::uint64_t> changeCounter() override;
     void put(Environment environment, const std::vector<SignedRecord>& records,
              const Occasion& occasion) override;
+    StoreFacts facts() override;
     std::optional<Record> find(Environment environment, const std::string& recordName) override;
     std::vector<Record> list(Environment environment) override;
     void forEachEvent(const EventQuery& query, const std::function<void(const Event&)>& visit) override;

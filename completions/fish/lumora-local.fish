@@ -37,5 +37,6 @@ complete -c lumora-local -n '__fish_seen_subcommand_from log' -l verify -d 'Chec
 complete -c lumora-local -n '__fish_seen_subcommand_from log' -l head -d 'The hash of the last event'
 complete -c lumora-local -n '__fish_seen_subcommand_from migrate' -x -l to -d 'The URL of the database'
 complete -c lumora-local -n '__fish_seen_subcommand_from serve' -x -l listen -d 'ADDRESS:PORT to listen on'
+complete -c lumora-local -n '__fish_seen_subcommand_from serve' -x -l metrics-listen -d 'ADDRESS:PORT for metrics'
 complete -c lumora-local -n '__fish_seen_subcommand_from serve' -r -l ready-file -d 'Gets the URL once it listens'
 complete -c lumora-local -n '__fish_seen_subcommand_from serve' -l update-platform -d 'Let platform.json name this service'

@@ -122,6 +122,18 @@ TEST_P(RecordStoreTest, ListsByName) {
     EXPECT_EQ(store.countRecords(), 2U);
 }
 
+TEST_P(RecordStoreTest, TellsHowManyRecordsAndEventsItHas) {
+    RecordStore& store = openAndKeep();
+    EXPECT_EQ(store.facts().records, 0U);
+    EXPECT_EQ(store.facts().events, 0U);
+    store.put(kProduction, {makeRecord("a", "1"), makeRecord("b", "2")}, kOccasion);
+    store.put(Environment::development, {makeRecord("a", "3")}, kOccasion);
+    open()->put(kProduction, {makeRecord("a", "4")}, kOccasion);  // in the place of the first one
+    EXPECT_EQ(store.facts().records, 3U);
+    EXPECT_EQ(store.facts().events, 4U);
+    EXPECT_EQ(store.countRecords(), 3U);
+}
+
 TEST_P(RecordStoreTest, PutsAllOrNone) {
     RecordStore& store = openAndKeep();
     SignedRecord broken = makeRecord("b", "");

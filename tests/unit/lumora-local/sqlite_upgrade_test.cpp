@@ -92,6 +92,27 @@ TEST_F(SqliteUpgradeTest, HappensOnceWhenManyOpenTheStore) {
     EXPECT_FALSE(std::filesystem::exists(copy_ + ".2"));
 }
 
+TEST_F(SqliteUpgradeTest, CountsTheRecordsOfAStoreThatKeptNoCount) {
+    { const SqliteStore store(path_); }
+    SQLite::Database(path_, SQLite::OPEN_READWRITE)
+        .exec("DROP TRIGGER record_is_added; DROP TRIGGER record_is_removed; DROP TABLE record_count");
+    std::vector<std::thread> openers;
+    for (int i = 0; i < 4; ++i) openers.emplace_back([&] { const SqliteStore store(path_); });
+    for (std::thread& opener : openers) opener.join();
+    EXPECT_EQ(SqliteStore(path_).countRecords(), 2U);
+    EXPECT_FALSE(std::filesystem::exists(path_ + ".version-2"));
+}
+
+TEST_F(SqliteUpgradeTest, CountsWhatProgramsDoThatKnowOfNoCount) {
+    SqliteStore store(path_);
+    SQLite::Database(path_, SQLite::OPEN_READWRITE)
+        .exec(
+            "DELETE FROM record WHERE name = 'early';"
+            "INSERT INTO record VALUES ('production', 'a', 'A', 0, 1, NULL, x'01');"
+            "INSERT INTO record VALUES ('production', 'b', 'B', 0, 1, NULL, x'01')");
+    EXPECT_EQ(store.countRecords(), 3U);
+}
+
 TEST_F(SqliteUpgradeTest, RefusesAVersionOfTheFuture) {
     SQLite::Database(path_, SQLite::OPEN_READWRITE).exec("PRAGMA user_version = 3");
     EXPECT_THROW(const SqliteStore store(path_), Failure);
