@@ -14,7 +14,8 @@ namespace {
 using foundation::escapeForTerminal;
 using foundation::format;
 
-constexpr std::array kActions{Action::issued, Action::reissued, Action::revoked, Action::reinstated};
+constexpr std::array kActions{Action::issued, Action::reissued, Action::revoked, Action::reinstated,
+                              Action::refused};
 constexpr std::array kReasons{Reason::compromised, Reason::superseded, Reason::withdrawn,
                               Reason::unspecified};
 constexpr std::size_t kHashDigits = 64;
@@ -46,6 +47,8 @@ std::string_view toString(Action action) {
             return "revoked";
         case Action::reinstated:
             return "reinstated";
+        case Action::refused:
+            return "refused";
     }
     return "issued";
 }
@@ -112,11 +115,11 @@ std::string eventAsJson(const Event& event) {
     nlohmann::ordered_json object{{"time", toRfc3339(event.time)},
                                   {"actor", escapeForTerminal(event.actor)},
                                   {"action", toString(event.action)},
-                                  {"record", event.record},
+                                  {"record", textOrNull(event.record)},
                                   {"label", escapeForTerminal(event.label)},
                                   {"reason", textOrNull(reasonText(event))},
                                   {"comment", textOrNull(event.comment)},
-                                  {"ticket", event.ticket},
+                                  {"ticket", textOrNull(event.ticket)},
                                   {"previous", event.previous},
                                   {"hash", event.hash}};
     if (event.environment != Environment::production) object["environment"] = toString(event.environment);

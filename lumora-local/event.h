@@ -7,13 +7,14 @@
 //   previous     the previous event's hash, 64 lower-case hexadecimal digits; 64 zeros for the first event
 //   time         RFC 3339 in UTC, whole seconds: 2026-11-20T19:55:00Z
 //   actor        who did it: a login name, or the name in a client's certificate
-//   action       issued, reissued, revoked or reinstated
+//   action       issued, reissued, revoked, reinstated or refused
 //   environment  production or development
-//   record       the record's name
+//   record       the record's name; empty if a refused request named none
 //   label        what the record was issued for
 //   reason       compromised, superseded, withdrawn or unspecified for a revocation; else empty
 //   comment      free text; may be empty
-//   ticket       SHA-256 of the ticket that the record got, 64 lower-case hexadecimal digits
+//   ticket       SHA-256 of the ticket that the record got, 64 lower-case hexadecimal digits; empty if
+//   refused
 #pragma once
 
 #include <optional>
@@ -26,8 +27,9 @@
 
 namespace pinwell::lumora {
 
-/// What happened to a record.
-enum class Action { issued, reissued, revoked, reinstated };
+/// What happened to a record. `refused`: nothing; somebody who may not, or asked for what cannot be, tried to
+/// change it.
+enum class Action { issued, reissued, revoked, reinstated, refused };
 
 /// Why a record was revoked.
 enum class Reason { compromised, superseded, withdrawn, unspecified };
@@ -51,7 +53,7 @@ struct Event {
     std::string label;
     std::optional<Reason> reason;  // of a revocation
     std::string comment;
-    std::string ticket;    // SHA-256 in hexadecimal
+    std::string ticket;    // SHA-256 in hexadecimal; empty if refused
     std::string previous;  // hash of the previous event
     std::string hash;
 };

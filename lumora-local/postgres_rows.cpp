@@ -182,6 +182,39 @@ void PostgresBatch::write(PostgresConnection& connection, Deadline deadline) {
     *this = PostgresBatch();
 }
 
+std::optional<PutOutcome> findRequest(PostgresConnection& connection, const Occasion& occasion,
+                                      Deadline deadline) {
+    if (!occasion.request) return std::nullopt;
+    const PostgresRows rows = connection.query(
+        "SELECT digest, event, ticket FROM request WHERE client = $1 AND key = $2 AND made > $3",
+        {PostgresParameter::bytes(occasion.request->client), occasion.request->key,
+         occasion.time.seconds - kRequestLife},
+        deadline);
+    if (rows.size() == 0) return std::nullopt;
+    if (rows.text(0, 0) != occasion.request->digest) throw ReusedKeyFailure();
+    static const std::string sql =
+        std::string("SELECT ") + kPostgresEventColumns + " FROM event WHERE hash = $1";
+    const PostgresRows events = connection.query(sql.c_str(), {rows.text(0, 1)}, deadline);
+    if (events.size() == 0) throw Failure(EX_CONFIG, "record store: the event of a request is missing");
+    return PutOutcome{readEvent(events, 0), foundation::toData(rows.bytes(0, 2))};
+}
+
+void keepRequest(PostgresConnection& connection, const Occasion& occasion, const Event& event,
+                 ByteView ticket, Deadline deadline) {
+    if (!occasion.request) return;
+    connection.query(
+        "DELETE FROM request WHERE (client, key) IN"
+        " (SELECT client, key FROM request WHERE made <= $1 ORDER BY made LIMIT 100)",
+        {occasion.time.seconds - kRequestLife}, deadline);
+    connection.query(
+        "INSERT INTO request (client, key, digest, made, event, ticket) VALUES ($1, $2, $3, $4, $5, $6)"
+        " ON CONFLICT (client, key) DO UPDATE SET digest = excluded.digest, made = excluded.made,"
+        " event = excluded.event, ticket = excluded.ticket",
+        {PostgresParameter::bytes(occasion.request->client), occasion.request->key, occasion.request->digest,
+         occasion.time.seconds, event.hash, PostgresParameter::bytes(ticket)},
+        deadline);
+}
+
 bool canNameARecord(std::string_view name) {
     return !name.empty() &&
            std::all_of(name.begin(), name.end(), [](char c) { return c > ' ' && c < '\x7f'; });

@@ -29,6 +29,23 @@ inline constexpr const char* kPostgresRecordColumns =
 /// Of the columns above. Throws Failure (EX_CONFIG) for hashes that do not have this form.
 Record readRecord(const PostgresRows& rows, std::size_t row);
 
+/// The same columns, the last one with the first 101 hashes alone.
+inline constexpr const char* kPostgresFoundRecordColumns =
+    "r.name, r.label, r.revoked, r.signed_at, r.asset IS NOT NULL,"
+    " (SELECT string_agg(int8send(h.algorithm) || int4send(length(h.hash)) || h.hash, '' ORDER BY h.position)"
+    "  FROM (SELECT * FROM hash WHERE environment = r.environment AND name = r.name"
+    "        ORDER BY position LIMIT 101) h)";
+static_assert(kHashesInSearch + 1 == 101);
+
+/// What became of the occasion's request when it was carried out before; `nullopt` if it was not, or the
+/// occasion has none. Throws ReusedKeyFailure.
+std::optional<PutOutcome> findRequest(PostgresConnection& connection, const Occasion& occasion,
+                                      Deadline deadline);
+
+/// Keeps the occasion's request, if it has one, and removes some of those that have been kept long enough.
+void keepRequest(PostgresConnection& connection, const Occasion& occasion, const Event& event,
+                 foundation::ByteView ticket, Deadline deadline);
+
 /// The text form of an array parameter, element by element.
 class PostgresArray {
   public:

@@ -19,8 +19,8 @@ constexpr const char* kVersionTable = R"(
     INSERT INTO lumora.store (version, records) SELECT 0, 0 WHERE NOT EXISTS (SELECT 1 FROM lumora.store);
 )";
 
-// From each version to the next. Tickets are mostly signatures, which no compression makes smaller.
-constexpr std::array<const char*, kPostgresVersion> kSteps{R"(
+// Tickets are mostly signatures, which no compression makes smaller.
+constexpr const char* kRecordsAndEvents = R"(
     CREATE TABLE record (
         environment text COLLATE "C" NOT NULL,
         name        text COLLATE "C" NOT NULL,
@@ -63,7 +63,29 @@ constexpr std::array<const char*, kPostgresVersion> kSteps{R"(
         $$ BEGIN RAISE EXCEPTION 'events are never changed and never removed'; END $$;
     CREATE TRIGGER events_stay BEFORE UPDATE OR DELETE OR TRUNCATE ON event
         FOR EACH STATEMENT EXECUTE FUNCTION events_stay();
-)"};
+)";
+
+constexpr const char* kRequestsAndSearches = R"(
+    -- The requests that issued and revoked, so that their repetition is known.
+    CREATE TABLE request (
+        client bytea NOT NULL,
+        key    text COLLATE "C" NOT NULL,
+        digest text COLLATE "C" NOT NULL,
+        made   bigint NOT NULL,                 -- seconds since 1970-01-01 UTC
+        event  text COLLATE "C" NOT NULL,       -- hash of the event that it made
+        ticket bytea NOT NULL,                  -- that it issued; the record may have got another one since
+        PRIMARY KEY (client, key)
+    );
+    CREATE INDEX request_by_time ON request (made);
+    -- Indexes by which each search reads a page and no more.
+    DROP INDEX IF EXISTS hash_by_bytes;
+    CREATE INDEX hash_by_bytes ON hash (environment, hash, name);
+    CREATE INDEX record_by_label ON record (environment, substring(label from 1 for 64), name);
+    CREATE INDEX event_by_time ON event (time, position);
+)";
+
+// From each version to the next.
+constexpr std::array<const char*, kPostgresVersion> kSteps{kRecordsAndEvents, kRequestsAndSearches};
 
 constexpr const char* kExists = "SELECT to_regclass('lumora.store') IS NOT NULL";
 constexpr const char* kVersion = "SELECT version FROM lumora.store";

@@ -14,7 +14,7 @@
 
 namespace pinwell::lumora {
 
-inline constexpr int kPostgresVersion = 1;
+inline constexpr int kPostgresVersion = 2;
 
 /// The version of the store's tables; `nullopt` if the database has none. Throws PostgresError.
 std::optional<int> postgresVersion(PostgresConnection& connection, Deadline deadline);

@@ -8,6 +8,7 @@
 #include "lumora-local/failure.h"
 #include "lumora-local/postgres_rows.h"
 #include "lumora-local/postgres_schema.h"
+#include "lumora-local/postgres_search.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -170,7 +171,7 @@ void PostgresStore::create(const PostgresPlace& place,
         if (pour) {
             pour({.event =
                       [&](const Event& event) {
-                          requireName(event.record);
+                          if (!event.record.empty()) requireName(event.record);  // an attempt may name none
                           batch.add(event, ++events);
                           writeIf(batch.isFull());
                       },
@@ -286,14 +287,23 @@ std::size_t PostgresStore::countRecords() {
     });
 }
 
-void PostgresStore::put(Environment environment, const std::vector<SignedRecord>& records,
-                        const Occasion& occasion) {
-    for (const SignedRecord& entry : records) requireName(entry.record.name);
+/// Runs work within a transaction that has the store's lock, again if the connection is lost. By the outcome's
+/// event it is known whether a commit without an answer took place. What the work changed is on the server's
+/// disk when this returns.
+PutOutcome PostgresStore::changing(const std::function<PutOutcome(PostgresConnection&, Deadline)>& work) {
     const Deadline deadline = Clock::now() + kChangingTime;
     for (;;) {
         try {
-            const std::string doubtful = putOnce(environment, records, occasion, deadline);
-            if (doubtful.empty() || wasCommitted(doubtful, deadline)) return;
+            auto lease = pool_.take(deadline);
+            lease.discard();
+            lease->execute(kBeginChange, deadline);
+            lockStore(*lease, deadline);
+            if (guard_) guard_(StoreUse::changing);
+            PutOutcome outcome = work(*lease, deadline);
+            // From here on the server decides alone: a statement's time limit would cut short its wait for a
+            // replica that is to have the change too.
+            lease->execute("SET LOCAL statement_timeout = 0", deadline);
+            if (commit(lease, deadline) || wasCommitted(outcome.event.hash, deadline)) return outcome;
         } catch (const PostgresError& error) {
             // Nothing was committed: the transaction did not come so far.
             const bool another = error.lost() || error.state().starts_with("40");
@@ -304,49 +314,77 @@ void PostgresStore::put(Environment environment, const std::vector<SignedRecord>
     }
 }
 
-/// Empty if the change was committed. If the connection was lost during the commit, the hash of the last
-/// event, by which wasCommitted() finds out.
-std::string PostgresStore::putOnce(Environment environment, const std::vector<SignedRecord>& records,
-                                   const Occasion& occasion, Deadline deadline) {
-    auto lease = pool_.take(deadline);
-    PostgresConnection& connection = *lease;
-    lease.discard();
-    connection.execute(kBeginChange, deadline);
-    lockStore(connection, deadline);
-    if (guard_) guard_(StoreUse::changing);
-    Head head = lastEventOf(connection, deadline);
-    std::int64_t added = 0;
-    PostgresBatch batch;
-    for (const SignedRecord& entry : records) {
-        const std::optional<bool> before = isRevoked(connection, environment, entry.record.name, deadline);
-        const Action action = actionOf(entry.record, before, occasion);
-        if (!entry.record.revoked && !occasion.reinstates)
-            if (const auto other = revokedBeside(connection, environment, entry.record, deadline))
-                refuseToGetAround(entry.record, *other);
-        if (before) {
-            connection.query("DELETE FROM record WHERE environment = $1 AND name = $2",
-                             {nameOf(environment), entry.record.name}, deadline);
-        } else {
-            ++added;
-        }
-        const Event event = makeEvent(environment, entry, action, occasion, std::move(head.hash));
-        batch.add(environment, entry);
-        batch.add(event, ++head.position);
-        batch.write(connection, deadline);
-        head.hash = event.hash;
-    }
-    connection.query("UPDATE store SET records = records + $1", {added}, deadline);
-    // From here on the server decides alone: a statement's time limit would cut short its wait for a replica
-    // that is to have the change too.
-    connection.execute("SET LOCAL statement_timeout = 0", deadline);
+/// Returns false if the connection was lost: what became of the transaction is not known then.
+bool PostgresStore::commit(PostgresPool::Lease& lease, Deadline deadline) {
     try {
-        connection.execute("COMMIT", deadline);
+        lease->execute("COMMIT", deadline);
     } catch (const PostgresError& error) {
         if (!error.lost()) throw;
-        return head.hash;
+        return false;
     }
     lease.keep();
-    return {};
+    return true;
+}
+
+PutOutcome PostgresStore::put(Environment environment, const std::vector<SignedRecord>& records,
+                              const Occasion& occasion) {
+    for (const SignedRecord& entry : records) requireName(entry.record.name);
+    return changing([&](PostgresConnection& connection, Deadline deadline) {
+        if (auto earlier = findRequest(connection, occasion, deadline)) return *std::move(earlier);
+        Head head = lastEventOf(connection, deadline);
+        std::int64_t added = 0;
+        PutOutcome outcome;
+        PostgresBatch batch;
+        for (const SignedRecord& entry : records) {
+            const std::optional<bool> before =
+                isRevoked(connection, environment, entry.record.name, deadline);
+            const Action action = actionOf(entry.record, before, occasion);
+            if (!entry.record.revoked && !occasion.reinstates)
+                if (const auto other = revokedBeside(connection, environment, entry.record, deadline))
+                    refuseToGetAround(entry.record, *other);
+            if (before) {
+                connection.query("DELETE FROM record WHERE environment = $1 AND name = $2",
+                                 {nameOf(environment), entry.record.name}, deadline);
+            } else {
+                ++added;
+            }
+            const Event event = makeEvent(environment, entry, action, occasion, std::move(head.hash));
+            batch.add(environment, entry);
+            batch.add(event, ++head.position);
+            batch.write(connection, deadline);
+            head.hash = event.hash;
+            if (outcome.event.hash.empty()) outcome.event = event;
+        }
+        connection.query("UPDATE store SET records = records + $1", {added}, deadline);
+        if (!records.empty())
+            keepRequest(connection, occasion, outcome.event, records.front().ticket, deadline);
+        return outcome;
+    });
+}
+
+void PostgresStore::noteRefusal(const RefusedAttempt& attempt, const Occasion& occasion) {
+    if (!attempt.record.empty()) requireName(attempt.record);
+    changing([&](PostgresConnection& connection, Deadline deadline) {
+        Head head = lastEventOf(connection, deadline);
+        PutOutcome outcome{makeEvent(attempt, occasion, std::move(head.hash)), std::nullopt};
+        PostgresBatch batch;
+        batch.add(outcome.event, head.position + 1);
+        batch.write(connection, deadline);
+        return outcome;
+    });
+}
+
+RecordPage PostgresStore::search(const RecordSearch& search) {
+    return reading([&](PostgresConnection& connection, Deadline deadline) {
+        return searchRecords(connection, search, deadline);
+    });
+}
+
+EventPage PostgresStore::search(const EventSearch& search) {
+    if (search.record && !canNameARecord(*search.record)) return {};
+    return reading([&](PostgresConnection& connection, Deadline deadline) {
+        return searchEvents(connection, search, deadline);
+    });
 }
 
 bool PostgresStore::wasCommitted(const std::string& eventHash, Deadline deadline) {
@@ -423,7 +461,8 @@ void PostgresStore::walkHistory(const HistoryVisitor& visitor) {
     constexpr const char* kStates =
         "SELECT r.environment, r.name, encode(sha256(r.ticket), 'hex'), r.revoked, e.ticket, e.action"
         " FROM record r LEFT JOIN LATERAL (SELECT ticket, action FROM event"
-        " WHERE environment = r.environment AND record = r.name ORDER BY position DESC LIMIT 1) e ON true";
+        " WHERE environment = r.environment AND record = r.name AND action <> 'refused'"
+        " ORDER BY position DESC LIMIT 1) e ON true";
     walking([&](PostgresConnection& connection) {
         connection.forEachRow(events.c_str(), {}, kSilence,
                               [&](const PostgresRows& rows) { visitor.event(readEvent(rows, 0)); });

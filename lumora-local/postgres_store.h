@@ -37,8 +37,11 @@ class PostgresStore final : public RecordStore {
     std::optional<Delivery> findTicket(Environment environment, const std::string& recordName) override;
     std::optional<foundation::Data> findAsset(const std::string& identifier) override;
     std::size_t countRecords() override;
-    void put(Environment environment, const std::vector<SignedRecord>& records,
-             const Occasion& occasion) override;
+    PutOutcome put(Environment environment, const std::vector<SignedRecord>& records,
+                   const Occasion& occasion) override;
+    void noteRefusal(const RefusedAttempt& attempt, const Occasion& occasion) override;
+    RecordPage search(const RecordSearch& search) override;
+    EventPage search(const EventSearch& search) override;
     StoreFacts facts() override;
     std::optional<Record> find(Environment environment, const std::string& recordName) override;
     std::vector<Record> list(Environment environment) override;
@@ -54,8 +57,8 @@ class PostgresStore final : public RecordStore {
     template <class Work>
     void walking(Work work);
     PostgresPool::Lease beginWalk();
-    std::string putOnce(Environment environment, const std::vector<SignedRecord>& records,
-                        const Occasion& occasion, Deadline deadline);
+    PutOutcome changing(const std::function<PutOutcome(PostgresConnection&, Deadline)>& work);
+    bool commit(PostgresPool::Lease& lease, Deadline deadline);
     bool wasCommitted(const std::string& eventHash, Deadline deadline);
 
     const PostgresPlace place_;

@@ -11,20 +11,21 @@ Action actionOf(const Record& record, std::optional<bool> revokedBefore, const O
     if (!revokedBefore) return Action::issued;
     if (!*revokedBefore) return Action::reissued;
     if (!occasion.reinstates) {
-        throw Failure(
-            EX_DATAERR,
+        throw RevokedFailure(
             foundation::format("record %@ (%@) is revoked; nothing was issued. To make it valid again: "
                                "--reinstate --comment TEXT",
-                               record.name, record.label));
+                               record.name, record.label),
+            record.name);
     }
     return Action::reinstated;
 }
 
 void refuseToGetAround(const Record& record, const std::string& revoked) {
-    throw Failure(EX_DATAERR,
-                  foundation::format("record %@ (%@) would make software of the revoked record %@ valid; "
-                                     "nothing was issued. To make it valid again: --reinstate --comment TEXT",
-                                     record.name, record.label, revoked));
+    throw RevokedFailure(
+        foundation::format("record %@ (%@) would make software of the revoked record %@ valid; "
+                           "nothing was issued. To make it valid again: --reinstate --comment TEXT",
+                           record.name, record.label, revoked),
+        revoked);
 }
 
 Event makeEvent(Environment environment, const SignedRecord& entry, Action action, const Occasion& occasion,
@@ -39,6 +40,19 @@ Event makeEvent(Environment environment, const SignedRecord& entry, Action actio
     if (action == Action::revoked) event.reason = occasion.reason.value_or(Reason::unspecified);
     event.comment = occasion.comment;
     event.ticket = foundation::toHex(sha256(entry.ticket));
+    event.previous = std::move(previous);
+    event.hash = hashOf(event);
+    return event;
+}
+
+Event makeEvent(const RefusedAttempt& attempt, const Occasion& occasion, std::string previous) {
+    Event event;
+    event.time = occasion.time;
+    event.actor = occasion.actor;
+    event.action = Action::refused;
+    event.environment = attempt.environment;
+    event.record = attempt.record;
+    event.comment = occasion.comment;
     event.previous = std::move(previous);
     event.hash = hashOf(event);
     return event;

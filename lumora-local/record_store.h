@@ -14,6 +14,7 @@
 #include "lumora-local/code_hash.h"
 #include "lumora-local/environment.h"
 #include "lumora-local/event.h"
+#include "lumora-local/failure.h"
 
 namespace pinwell::lumora {
 
@@ -69,6 +70,15 @@ struct SignedRecord {
     foundation::Data ticket;
 };
 
+/// The request by which a change comes, so that the store knows its repetition. Each is kept for
+/// kRequestLife, counted from the occasion's time.
+struct RequestIdentity {
+    std::string client;
+    std::string key;     // by which the client knows the request; of that client alone
+    std::string digest;  // of all that the request asks for: text that another request does not have
+};
+inline constexpr std::int64_t kRequestLife = std::int64_t{24} * 60 * 60;  // seconds
+
 /// Who changes records, when and why. Becomes part of each event.
 struct Occasion {
     foundation::Date time;
@@ -76,6 +86,38 @@ struct Occasion {
     std::optional<Reason> reason;  // of a revocation
     std::string comment;
     bool reinstates = false;  // a valid ticket may take the place of a revoked one
+    std::optional<RequestIdentity> request{};
+};
+
+/// What became of a put.
+struct PutOutcome {
+    Event event;                              // about the first record
+    std::optional<foundation::Data> earlier;  // its ticket, if the same request was carried out before
+};
+
+/// A put that would make a revoked record valid.
+class RevokedFailure : public Failure {
+  public:
+    RevokedFailure(const std::string& text, std::string revoked)
+        : Failure(EX_DATAERR, text), revoked_(std::move(revoked)) {}
+
+    /// The name of the record that is revoked.
+    const std::string& revoked() const noexcept { return revoked_; }
+
+  private:
+    std::string revoked_;
+};
+
+/// A request under the key of another one.
+class ReusedKeyFailure : public Failure {
+  public:
+    ReusedKeyFailure() : Failure(EX_DATAERR, "the key of the request belongs to another request") {}
+};
+
+/// An attempt to change a record that was refused before it came to the store.
+struct RefusedAttempt {
+    Environment environment = Environment::production;
+    std::string record;  // empty if the attempt named none
 };
 
 /// A record beside the last event about it, for checks.
@@ -113,15 +155,84 @@ struct EventQuery {
     std::optional<foundation::Date> since;  // events of this second and later
 };
 
+/// How much of a label a search compares: bytes from its beginning.
+inline constexpr std::size_t kSearchedLabelBytes = 64;
+
+/// How many of a record's hashes a search returns at most.
+inline constexpr std::size_t kHashesInSearch = 100;
+
+/// After which record a page begins: by the searched bytes of its label in a search by label, and by its
+/// name.
+struct RecordCursor {
+    std::string label;
+    std::string name;
+    bool operator==(const RecordCursor&) const = default;
+};
+
+/// At most one of `name`, `label` and `hash` is there. A search by label is in the order of the labels'
+/// searched bytes, then of names; any other in the order of names.
+struct RecordSearch {
+    Environment environment = Environment::production;
+    std::optional<std::string> name;       // how it begins; printable ASCII
+    std::optional<std::string> label;      // how it begins; not empty, at most kSearchedLabelBytes bytes
+    std::optional<foundation::Data> hash;  // that the ticket lists, whatever its digest type
+    std::size_t limit = 0;
+    std::optional<RecordCursor> after;
+};
+
+struct FoundRecord {
+    Record record;           // with at most kHashesInSearch hashes
+    bool hashesCut = false;  // it has more
+};
+
+struct RecordPage {
+    std::vector<FoundRecord> records;
+    std::optional<RecordCursor> next;  // `nullopt`: there are no more
+};
+
+/// After which event a page begins.
+struct EventCursor {
+    std::int64_t time = 0;  // seconds since 1970-01-01 UTC
+    std::int64_t position = 0;
+    bool operator==(const EventCursor&) const = default;
+};
+
+/// In the order of the chain; with `since` and without `record`, in the order of time.
+struct EventSearch {
+    std::optional<std::string> record;
+    Environment environment = Environment::production;  // of the record; without one, events of all are found
+    std::optional<foundation::Date> since;              // events of this second and later
+    std::size_t limit = 0;
+    std::optional<EventCursor> after;
+};
+
+/// A page may have fewer events than the limit and still a next one.
+struct EventPage {
+    std::vector<Event> events;
+    std::optional<EventCursor> next;
+};
+
 /// Calls may come from any thread, several at a time. They throw Failure.
 class RecordStore : public RecordSource {
   public:
     /// Puts all records into the store, each in the place of an earlier record of its name, and appends an
     /// event for each, in one transaction; or changes nothing. A valid ticket for a revoked record, or for a
-    /// hash that another record has revoked, is refused (EX_DATAERR), unless the occasion reinstates. When
-    /// this returns, the change survives a crash.
-    virtual void put(Environment environment, const std::vector<SignedRecord>& records,
-                     const Occasion& occasion) = 0;
+    /// hash that another record has revoked, is refused (RevokedFailure), unless the occasion reinstates.
+    /// When this returns, the change survives a crash.
+    ///
+    /// If the occasion's request was carried out before, nothing changes, and the outcome is that of the
+    /// first time; if its key belongs to another request: ReusedKeyFailure. `records` has one record then.
+    virtual PutOutcome put(Environment environment, const std::vector<SignedRecord>& records,
+                           const Occasion& occasion) = 0;
+
+    /// Appends an event `refused`, which changes no record.
+    virtual void noteRefusal(const RefusedAttempt& attempt, const Occasion& occasion) = 0;
+
+    /// One page of the records that fit. What a call reads and holds does not grow with the store.
+    virtual RecordPage search(const RecordSearch& search) = 0;
+
+    /// One page of the events that fit. What a call reads and holds does not grow with the store.
+    virtual EventPage search(const EventSearch& search) = 0;
 
     /// Costs the same however much the store holds.
     virtual StoreFacts facts() = 0;
@@ -148,16 +259,19 @@ class RecordStore : public RecordSource {
     virtual void holdStill(const std::function<void(const std::function<void()>& confirm)>& work) = 0;
 };
 
-/// What putting `record` does to a record of its name that is there already. Throws Failure (EX_DATAERR) if
-/// that would make a revoked record valid and the occasion does not reinstate.
+/// What putting `record` does to a record of its name that is there already. Throws RevokedFailure if that
+/// would make a revoked record valid and the occasion does not reinstate.
 Action actionOf(const Record& record, std::optional<bool> revokedBefore, const Occasion& occasion);
 
-/// Throws the Failure (EX_DATAERR) of a put whose ticket would vouch for what the record `revoked` has
+/// Throws the RevokedFailure of a put whose ticket would vouch for what the record `revoked` has
 /// revoked.
 [[noreturn]] void refuseToGetAround(const Record& record, const std::string& revoked);
 
 /// The event for a put, with its hash.
 Event makeEvent(Environment environment, const SignedRecord& entry, Action action, const Occasion& occasion,
                 std::string previous);
+
+/// The event for a refused attempt, with its hash.
+Event makeEvent(const RefusedAttempt& attempt, const Occasion& occasion, std::string previous);
 
 }  // namespace pinwell::lumora

@@ -16,6 +16,13 @@ T known(const std::optional<T>& value, const char* column, const std::string& te
     return *value;
 }
 
+foundation::Data bytesOf(const SQLite::Column& column) {
+    const auto* bytes = static_cast<const std::byte*>(column.getBlob());
+    const foundation::ByteView view(bytes,
+                                    bytes == nullptr ? 0 : static_cast<std::size_t>(column.getBytes()));
+    return foundation::toData(view);
+}
+
 }  // namespace
 
 Event readEvent(const SQLite::Statement& row) {
@@ -49,6 +56,41 @@ void insertEvent(SQLite::Database& database, const Event& event) {
     statement.bind(9, event.ticket);
     statement.bind(10, event.previous);
     statement.bind(11, event.hash);
+    statement.exec();
+}
+
+std::optional<PutOutcome> findRequest(SQLite::Database& database, const Occasion& occasion) {
+    if (!occasion.request) return std::nullopt;
+    SQLite::Statement row(
+        database, "SELECT digest, event, ticket FROM request WHERE client = ? AND key = ? AND made > ?");
+    row.bind(1, occasion.request->client);
+    row.bind(2, occasion.request->key);
+    row.bind(3, occasion.time.seconds - kRequestLife);
+    if (!row.executeStep()) return std::nullopt;
+    if (row.getColumn(0).getString() != occasion.request->digest) throw ReusedKeyFailure();
+    SQLite::Statement event(database, std::string("SELECT ") + kEventColumns + " FROM event WHERE hash = ?");
+    event.bind(1, row.getColumn(1).getString());
+    if (!event.executeStep()) throw Failure(EX_CONFIG, "record store: the event of a request is missing");
+    return PutOutcome{readEvent(event), bytesOf(row.getColumn(2))};
+}
+
+void keepRequest(SQLite::Database& database, const Occasion& occasion, const Event& event,
+                 foundation::ByteView ticket) {
+    if (!occasion.request) return;
+    SQLite::Statement expired(database,
+                              "DELETE FROM request WHERE rowid IN (SELECT rowid FROM request WHERE made <= ?"
+                              " ORDER BY made LIMIT 100)");
+    expired.bind(1, occasion.time.seconds - kRequestLife);
+    expired.exec();
+    SQLite::Statement statement(database,
+                                "INSERT OR REPLACE INTO request (client, key, digest, made, event, ticket) "
+                                "VALUES (?, ?, ?, ?, ?, ?)");
+    statement.bind(1, occasion.request->client);
+    statement.bind(2, occasion.request->key);
+    statement.bind(3, occasion.request->digest);
+    statement.bind(4, occasion.time.seconds);
+    statement.bind(5, event.hash);
+    statement.bind(6, static_cast<const void*>(ticket.data()), static_cast<int>(ticket.size()));
     statement.exec();
 }
 

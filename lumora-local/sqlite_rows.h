@@ -23,6 +23,14 @@ inline constexpr const char* kEventColumns =
 
 void insertEvent(SQLite::Database& database, const Event& event);
 
+/// What became of the occasion's request when it was carried out before; `nullopt` if it was not, or the
+/// occasion has none. Throws ReusedKeyFailure.
+std::optional<PutOutcome> findRequest(SQLite::Database& database, const Occasion& occasion);
+
+/// Keeps the occasion's request, if it has one, and removes some of those that have been kept long enough.
+void keepRequest(SQLite::Database& database, const Occasion& occasion, const Event& event,
+                 foundation::ByteView ticket);
+
 /// hashBeforeTheFirstEvent() if there is none.
 std::string lastEventHash(SQLite::Database& database);
 

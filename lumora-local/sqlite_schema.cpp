@@ -18,7 +18,7 @@ namespace {
 
 using foundation::format;
 
-constexpr int kCurrentVersion = 2;
+constexpr int kCurrentVersion = 3;
 
 constexpr const char* kRecordTables = R"(
     CREATE TABLE record (
@@ -43,11 +43,8 @@ constexpr const char* kRecordTables = R"(
     );
 )";
 
-// A store of version 2 may lack it, which costs time alone.
-constexpr const char* kHashIndex = "CREATE INDEX IF NOT EXISTS hash_by_bytes ON hash (environment, hash)";
-
-// How many records there are: counting ten million takes seconds. A store of version 2 may lack it, and then
-// gets it; programs that do not know of it count as well, for the triggers are the database's.
+// How many records there are: counting ten million takes seconds. A store of version 2 may have it already;
+// programs that do not know of it count as well, for the triggers are the database's.
 constexpr const char* kRecordCount = R"(
     CREATE TABLE record_count (records INTEGER NOT NULL);
     INSERT INTO record_count (records) SELECT count(*) FROM record;
@@ -78,6 +75,25 @@ constexpr const char* kEventTable = R"(
         BEGIN SELECT RAISE(ABORT, 'events are never changed'); END;
     CREATE TRIGGER event_is_not_removed BEFORE DELETE ON event
         BEGIN SELECT RAISE(ABORT, 'events are never removed'); END;
+)";
+
+// Since version 3: the requests that issued and revoked, so that their repetition is known, and indexes by
+// which each search reads a page and no more. A store of version 2 may have an index of hashes already.
+constexpr const char* kRequestTableAndSearches = R"(
+    CREATE TABLE request (
+        client TEXT NOT NULL,
+        key    TEXT NOT NULL,
+        digest TEXT NOT NULL,
+        made   INTEGER NOT NULL,    -- seconds since 1970-01-01 UTC
+        event  TEXT NOT NULL,       -- hash of the event that it made
+        ticket BLOB NOT NULL,       -- that it issued; the record may have got another one since
+        PRIMARY KEY (client, key)
+    );
+    CREATE INDEX request_by_time ON request (made);
+    DROP INDEX IF EXISTS hash_by_bytes;
+    CREATE INDEX hash_by_bytes ON hash (environment, hash, name);
+    CREATE INDEX record_by_label ON record (environment, substr(CAST(label AS BLOB), 1, 64), name);
+    CREATE INDEX event_by_time ON event (time, position);
 )";
 
 int versionOf(SQLite::Database& database) {
@@ -141,32 +157,30 @@ void configureSqlite(SQLite::Database& database) {
 void createSqliteSchema(SQLite::Database& database) {
     SQLite::Transaction transaction(database);
     database.exec(kRecordTables);
-    database.exec(kHashIndex);
     database.exec(kEventTable);
     database.exec(kRecordCount);
+    database.exec(kRequestTableAndSearches);
     setVersion(database);
     transaction.commit();
 }
 
 void upgradeSqliteSchema(SQLite::Database& database, const std::string& path) {
-    if (versionOf(database) == kCurrentVersion && database.tableExists("record_count")) return;
+    if (versionOf(database) == kCurrentVersion) return;
     SQLite::Transaction transaction(database, SQLite::TransactionBehavior::IMMEDIATE);
     const int version = versionOf(database);  // another process may have been first
-    if (version == kCurrentVersion) {
-        if (!database.tableExists("record_count")) database.exec(kRecordCount);
-        transaction.commit();
-        return;
-    }
-    if (version != 1) {
+    if (version == kCurrentVersion) return;
+    if (version != 1 && version != 2) {
         throw Failure(EX_DATAERR,
                       format("%@: record store of version %d; this program knows versions 1 to %d", path,
                              version, kCurrentVersion));
     }
     keepCopy(path, version);
-    database.exec(kHashIndex);
-    database.exec(kEventTable);
-    database.exec(kRecordCount);
-    logExistingRecords(database);
+    if (version == 1) {
+        database.exec(kEventTable);
+        logExistingRecords(database);
+    }
+    if (!database.tableExists("record_count")) database.exec(kRecordCount);
+    database.exec(kRequestTableAndSearches);
     setVersion(database);
     transaction.commit();
 }

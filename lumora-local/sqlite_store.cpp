@@ -14,6 +14,7 @@
 #include "lumora-local/sha256.h"
 #include "lumora-local/sqlite_rows.h"
 #include "lumora-local/sqlite_schema.h"
+#include "lumora-local/sqlite_search.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -250,13 +251,26 @@ std::size_t SqliteStore::countRecords() {
     });
 }
 
-void SqliteStore::put(Environment environment, const std::vector<SignedRecord>& records,
-                      const Occasion& occasion) {
+/// Runs work within a transaction. What it changed is on the disk when this returns.
+template <class Work>
+auto SqliteStore::changing(Work work) {
     const std::lock_guard lock(mutex_);
-    guarded([&] {
+    return guarded([&] {
         // Immediate: a transaction that starts by reading cannot be upgraded behind another writer.
         SQLite::Transaction transaction(*database_, SQLite::TransactionBehavior::IMMEDIATE);
         if (guard_) guard_(StoreUse::changing);
+        auto result = work();
+        transaction.commit();
+        ++changes_;
+        return result;
+    });
+}
+
+PutOutcome SqliteStore::put(Environment environment, const std::vector<SignedRecord>& records,
+                            const Occasion& occasion) {
+    return changing([&] {
+        if (auto earlier = findRequest(*database_, occasion)) return *std::move(earlier);
+        PutOutcome outcome;
         std::string previous = lastEventHash(*database_);
         for (const SignedRecord& entry : records) {
             const Action action =
@@ -270,9 +284,10 @@ void SqliteStore::put(Environment environment, const std::vector<SignedRecord>& 
             const Event event = makeEvent(environment, entry, action, occasion, std::move(previous));
             insertEvent(*database_, event);
             previous = event.hash;
+            if (outcome.event.hash.empty()) outcome.event = event;
         }
-        transaction.commit();
-        ++changes_;
+        if (!records.empty()) keepRequest(*database_, occasion, outcome.event, records.front().ticket);
+        return outcome;
     });
 }
 
@@ -285,6 +300,21 @@ StoreFacts SqliteStore::facts() {
         return StoreFacts{static_cast<std::uint64_t>(row.getColumn(0).getInt64()),
                           static_cast<std::uint64_t>(row.getColumn(1).getInt64()), std::nullopt};
     });
+}
+
+void SqliteStore::noteRefusal(const RefusedAttempt& attempt, const Occasion& occasion) {
+    changing([&] {
+        insertEvent(*database_, makeEvent(attempt, occasion, lastEventHash(*database_)));
+        return true;
+    });
+}
+
+RecordPage SqliteStore::search(const RecordSearch& search) {
+    return reading([&] { return searchRecords(*database_, search); });
+}
+
+EventPage SqliteStore::search(const EventSearch& search) {
+    return reading([&] { return searchEvents(*database_, search); });
 }
 
 std::optional<Record> SqliteStore::find(Environment environment, const std::string& recordName) {
@@ -329,8 +359,9 @@ void SqliteStore::walkHistory(const HistoryVisitor& visitor) {
         SQLite::Statement records(
             *database_,
             "SELECT r.environment, r.name, r.ticket, r.revoked, e.ticket, e.action FROM record r"
-            " LEFT JOIN event e ON e.position = (SELECT max(position) FROM event"
-            " WHERE environment = r.environment AND record = r.name)");
+            " LEFT JOIN event e ON e.position = (SELECT position FROM event"
+            " WHERE environment = r.environment AND record = r.name AND action <> 'refused'"
+            " ORDER BY position DESC LIMIT 1)");
         while (records.executeStep()) {
             RecordState state;
             state.environment =

@@ -23,7 +23,7 @@ class SqliteStore final : public RecordStore {
     static void create(const std::string& path);
 
     /// Opens an existing one. A store of an earlier version is brought forward first, in one transaction; a
-    /// copy of what it was stays beside it (`PATH.version-1`). Throws Failure.
+    /// copy of what it was stays beside it (`PATH.version-N`). Throws Failure.
     explicit SqliteStore(const std::string& path, StoreGuard guard = {});
     ~SqliteStore() override;
 
@@ -33,8 +33,11 @@ class SqliteStore final : public RecordStore {
 
     /// From `PRAGMA data_version`, which tells of other connections, and a count of this one's own changes.
     std::optional<std::uint64_t> changeCounter() override;
-    void put(Environment environment, const std::vector<SignedRecord>& records,
-             const Occasion& occasion) override;
+    PutOutcome put(Environment environment, const std::vector<SignedRecord>& records,
+                   const Occasion& occasion) override;
+    void noteRefusal(const RefusedAttempt& attempt, const Occasion& occasion) override;
+    RecordPage search(const RecordSearch& search) override;
+    EventPage search(const EventSearch& search) override;
     StoreFacts facts() override;
     std::optional<Record> find(Environment environment, const std::string& recordName) override;
     std::vector<Record> list(Environment environment) override;
@@ -47,6 +50,8 @@ class SqliteStore final : public RecordStore {
   private:
     template <class Work>
     auto reading(Work work);
+    template <class Work>
+    auto changing(Work work);
 
     const std::string path_;
     const StoreGuard guard_;

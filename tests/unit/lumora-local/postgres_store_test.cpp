@@ -97,12 +97,29 @@ TEST_F(PostgresStoreTest, BringsAnEarlierVersionForward) {
     EXPECT_EQ(PostgresStore(place).countRecords(), 1U);
 }
 
+TEST_F(PostgresStoreTest, BringsRecordsAndEventsForward) {
+    PostgresCluster& cluster = PostgresCluster::shared();
+    const std::string url = cluster.makeDatabase();
+    PostgresStore::create(placeOf(url));
+    PostgresStore(placeOf(url)).put(kProduction, {makeRecord("a")}, kOccasion);
+    cluster.sql(url,
+                "SET search_path = lumora; DROP TABLE request; DROP INDEX record_by_label;"
+                " DROP INDEX event_by_time; UPDATE store SET version = 1");
+    PostgresStore store(placeOf(url));
+    RecordSearch search;
+    search.label = "Sample";
+    search.limit = 1;
+    EXPECT_EQ(store.search(search).records.size(), 1U);
+    EXPECT_EQ(verifyHistory(store, std::nullopt).events, 1U);
+    EXPECT_EQ(cluster.sql(url, "SELECT version FROM lumora.store"), "2\n");
+}
+
 TEST_F(PostgresStoreTest, StopsWhenAnotherProgramHasBroughtItForward) {
     PostgresCluster& cluster = PostgresCluster::shared();
     const std::string url = cluster.makeDatabase();
     PostgresStore::create(placeOf(url));
     PostgresStore store(placeOf(url));
-    cluster.sql(url, "UPDATE lumora.store SET version = 2");
+    cluster.sql(url, "UPDATE lumora.store SET version = 3");
     EXPECT_EQ(failureOf([&] { store.put(kProduction, {makeRecord("a")}, kOccasion); }).exitStatus(),
               EX_CONFIG);
     EXPECT_EQ(store.headHash(), hashBeforeTheFirstEvent());

@@ -68,7 +68,7 @@ TEST_F(SqliteUpgradeTest, LogsWhatTheRecordsSay) {
 
 TEST_F(SqliteUpgradeTest, KeepsACopyForTheOwnerAlone) {
     { const SqliteStore store(path_); }
-    EXPECT_EQ(versionAt(path_), 2);
+    EXPECT_EQ(versionAt(path_), 3);
     EXPECT_EQ(versionAt(copy_), 1);
     SQLite::Database copy(copy_, SQLite::OPEN_READONLY);
     EXPECT_EQ(copy.execAndGet("SELECT count(*) FROM record").getInt(), 2);
@@ -95,12 +95,15 @@ TEST_F(SqliteUpgradeTest, HappensOnceWhenManyOpenTheStore) {
 TEST_F(SqliteUpgradeTest, CountsTheRecordsOfAStoreThatKeptNoCount) {
     { const SqliteStore store(path_); }
     SQLite::Database(path_, SQLite::OPEN_READWRITE)
-        .exec("DROP TRIGGER record_is_added; DROP TRIGGER record_is_removed; DROP TABLE record_count");
+        .exec(
+            "DROP TRIGGER record_is_added; DROP TRIGGER record_is_removed; DROP TABLE record_count;"
+            "DROP TABLE request; DROP INDEX record_by_label; DROP INDEX event_by_time;"
+            "PRAGMA user_version = 2");
     std::vector<std::thread> openers;
     for (int i = 0; i < 4; ++i) openers.emplace_back([&] { const SqliteStore store(path_); });
     for (std::thread& opener : openers) opener.join();
     EXPECT_EQ(SqliteStore(path_).countRecords(), 2U);
-    EXPECT_FALSE(std::filesystem::exists(path_ + ".version-2"));
+    EXPECT_FALSE(std::filesystem::exists(path_ + ".version-2.2"));
 }
 
 TEST_F(SqliteUpgradeTest, CountsWhatProgramsDoThatKnowOfNoCount) {
@@ -113,10 +116,31 @@ TEST_F(SqliteUpgradeTest, CountsWhatProgramsDoThatKnowOfNoCount) {
     EXPECT_EQ(store.countRecords(), 3U);
 }
 
-TEST_F(SqliteUpgradeTest, RefusesAVersionOfTheFuture) {
-    SQLite::Database(path_, SQLite::OPEN_READWRITE).exec("PRAGMA user_version = 3");
-    EXPECT_THROW(const SqliteStore store(path_), Failure);
+TEST_F(SqliteUpgradeTest, BringsAStoreThatHasEventsForwardWithoutAnotherEvent) {
+    SQLite::Database(path_, SQLite::OPEN_READWRITE).exec(R"(
+        CREATE TABLE event (position INTEGER PRIMARY KEY AUTOINCREMENT, time INTEGER NOT NULL,
+            actor TEXT NOT NULL, action TEXT NOT NULL, environment TEXT NOT NULL, record TEXT NOT NULL,
+            label TEXT NOT NULL, reason TEXT, comment TEXT NOT NULL, ticket TEXT NOT NULL,
+            previous TEXT NOT NULL UNIQUE, hash TEXT NOT NULL UNIQUE);
+        CREATE INDEX event_by_record ON event (environment, record, position);
+        CREATE INDEX hash_by_bytes ON hash (environment, hash);
+        PRAGMA user_version = 2;
+    )");
+    SqliteStore store(path_);
     EXPECT_EQ(versionAt(path_), 3);
+    EXPECT_EQ(versionAt(path_ + ".version-2"), 2);
+    EXPECT_EQ(store.headHash(), hashBeforeTheFirstEvent());
+    RecordSearch search;
+    search.label = "Late";
+    search.limit = 10;
+    ASSERT_EQ(store.search(search).records.size(), 1U);
+    EXPECT_TRUE(store.search(search).records.front().record.revoked);
+}
+
+TEST_F(SqliteUpgradeTest, RefusesAVersionOfTheFuture) {
+    SQLite::Database(path_, SQLite::OPEN_READWRITE).exec("PRAGMA user_version = 4");
+    EXPECT_THROW(const SqliteStore store(path_), Failure);
+    EXPECT_EQ(versionAt(path_), 4);
 }
 
 }  // namespace

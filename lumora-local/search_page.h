@@ -1,0 +1,59 @@
+// What the searches of both stores have in common.
+#pragma once
+
+#include <string>
+
+#include "lumora-local/record_store.h"
+
+namespace pinwell::lumora {
+
+/// How many events of one record a search with `since` reads for one page.
+inline constexpr std::size_t kEventsReadForAPage = 1000;
+
+/// The first text, byte by byte, after all that begin with `prefix`. Empty if there is none: the prefix is
+/// empty, or has bytes of the value 255 alone.
+std::string endOfPrefix(std::string prefix);
+
+/// Where a page lies. No name of a record is empty, and each is printable ASCII.
+struct SearchRange {
+    std::string firstName;   // at it; after it, in a search by label
+    std::string endName;     // before it; has no meaning in other searches than those by name
+    std::string firstLabel;  // with the first name of this label, in a search by label
+    std::string endLabel;    // before it
+};
+
+SearchRange rangeOf(const RecordSearch& search);
+
+/// The bytes of a label that a search compares.
+std::string searchedBytes(const std::string& label);
+
+/// Turns `limit + 1` records, or fewer, into a page of `limit`. `byLabel`: the search is by label.
+RecordPage makePage(std::vector<FoundRecord> records, std::size_t limit, bool byLabel);
+
+/// Leaves out the hashes over the bound; `record` was read with one more at most.
+FoundRecord cutHashes(Record record);
+
+/// Collects the events of a page: those that fit of all that are read, in their order.
+class EventPageMaker {
+  public:
+    explicit EventPageMaker(const EventSearch& search) : search_(search) {}
+
+    /// How many rows to read at most: one more than the page needs.
+    std::size_t rows() const noexcept;
+
+    /// Whether time is a condition that the database has not looked at.
+    bool filtersTime() const noexcept { return search_.record && search_.since; }
+
+    /// Takes the next row. Returns false if the page is full.
+    bool take(Event event, std::int64_t position);
+
+    EventPage finish() { return std::move(page_); }
+
+  private:
+    const EventSearch& search_;
+    EventPage page_;
+    EventCursor last_;
+    std::size_t read_ = 0;
+};
+
+}  // namespace pinwell::lumora
