@@ -102,10 +102,30 @@ void Connection::handshake() {
     tls_ = context_.tls.current();
     stream_.emplace(*std::exchange(plain_, std::nullopt), *tls_);
     stream_->async_handshake(asio::ssl::stream_base::server, [self = shared_from_this()](ErrorCode failure) {
+        if (failure) self->logFailedHandshake(failure);
         if (failure || self->phase_ == Phase::closing) return self->timer_.cancel(), void();
         self->established_ = true;
+        if (self->context_.tls.asksForClients()) {
+            self->client_ = clientOf(self->stream_->native_handle());
+            if (!self->client_) return self->close(false);
+        }
         self->awaitRequest();
     });
+}
+
+/// Only where clients have names: whoever comes without one would go unnoticed otherwise.
+void Connection::logFailedHandshake(ErrorCode error) const {
+    if (!context_.tls.asksForClients() || phase_ == Phase::closing ||
+        error.category() != asio::error::get_ssl_category())
+        return;
+    context_.errorLog(format("%@: no connection: %s", peer_, error.message()));
+}
+
+/// A client whose certificate has expired since the handshake, or was judged by authorities that a reload has
+/// replaced, has to come again.
+bool Connection::mayGoOn() const {
+    if (!client_) return true;
+    return foundation::Date::now() <= client_->validUntil && tls_ == context_.tls.current();
 }
 
 void Connection::awaitRequest() {
@@ -124,6 +144,7 @@ void Connection::awaitRequest() {
 }
 
 void Connection::beginRequest() {
+    if (!mayGoOn()) return close(false);
     phase_ = Phase::reading;
     context_.table.becomeBusy(identifier_);
     ++served_;
@@ -148,7 +169,7 @@ void Connection::onRead(ErrorCode error, std::size_t count) {
     received_ += count;
     if (error) return refuseUnreadable(error);
     if (!parser_->is_header_done()) {
-        if (received_ > context_.limits.headBytes) return respond(requestRefusal(431), true);
+        if (received_ > context_.limits.headBytes) return refuse(431, true);
         return readMore();
     }
     if (!headSeen_) {
@@ -157,23 +178,23 @@ void Connection::onRead(ErrorCode error, std::size_t count) {
     }
     if (parser_->is_done()) return onBody();
     if (received_ > context_.limits.headBytes + kMaximumBodySize + kFramingAllowance) {
-        return respond(requestRefusal(413), true);
+        return refuse(413, true);
     }
     readMore();
 }
 
 void Connection::refuseUnreadable(ErrorCode error) {
-    if (timedOut_) return respond(requestRefusal(408), true);
+    if (timedOut_) return refuse(408, true);
     const bool headDone = parser_->is_header_done();
     if (error == http::error::header_limit || (error == http::error::buffer_overflow && !headDone)) {
-        return respond(requestRefusal(431), true);
+        return refuse(431, true);
     }
     if (error == http::error::body_limit || error == http::error::buffer_overflow) {
-        return respond(requestRefusal(413), true);
+        return refuse(413, true);
     }
     if (error.category() == make_error_code(http::error::end_of_stream).category() &&
         error != http::error::end_of_stream && error != http::error::partial_message) {
-        return respond(requestRefusal(400), true);
+        return refuse(400, true);
     }
     close(false);  // the peer has gone
 }
@@ -185,17 +206,30 @@ std::optional<Answer> Connection::guarded(Work&& work) {
     } catch (const std::exception& error) {
         context_.errorLog(format("cannot answer a request: %s", error.what()));
         context_.counts.storeFailed();
-        return refusalForNow("The records cannot be read at the moment");
+        return context_.service.refuseForNow("The records cannot be read at the moment");
     }
+}
+
+RequestHead Connection::headOfRequest() const {
+    RequestHead head = headOf(parser_->get());
+    if (client_) head.client = client_->name;
+    return head;
+}
+
+void Connection::refuse(int status, bool bodyLeftBehind) {
+    if (!headSeen_) return respond(context_.service.refuse(status, nullptr), bodyLeftBehind);
+    const RequestHead head = headOfRequest();
+    respond(context_.service.refuse(status, &head), bodyLeftBehind);
 }
 
 void Connection::onHead() {
     const HttpRequest& request = parser_->get();
     if (!request.keep_alive()) closeAfterwards_ = true;
-    if (const auto refused = refuseHead(request)) return respond(*refused, announcesBody(request));
-    std::optional<Answer> answer = guarded([&] { return context_.lookups.answerHead(headOf(request)); });
-    if (!answer) answer = refuseMissingLength(request);
+    if (const auto status = refuseHead(request)) return refuse(*status, announcesBody(request));
+    const std::optional<Answer> answer =
+        guarded([&] { return context_.service.answerHead(headOfRequest()); });
     if (answer) return respond(*answer, announcesBody(request));
+    if (const auto status = refuseMissingLength(request)) return refuse(*status, announcesBody(request));
     if (parser_->is_done()) return onBody();
     if (expectsContinue(request)) return continueThenRead();
     readMore();
@@ -211,16 +245,16 @@ void Connection::continueThenRead() {
 
 void Connection::onBody() {
     const HttpRequest& request = parser_->get();
-    respond(*guarded([&] {
-        return std::optional(context_.lookups.answerLookup(headOf(request), request.body()));
-    }),
-            false);
+    respond(
+        *guarded([&] { return std::optional(context_.service.answerBody(headOfRequest(), request.body())); }),
+        false);
 }
 
 void Connection::count(const Answer& answer) const {
     const auto target = headSeen_ ? parser_->get().target() : boost::beast::string_view();
     context_.counts.requestAnswered(
-        headSeen_ ? kindOfTarget({target.data(), target.size()}) : RequestKind::unreadable, answer.status,
+        headSeen_ ? context_.service.kindOf({target.data(), target.size()}) : RequestKind::unreadable,
+        answer.status,
         std::chrono::duration_cast<std::chrono::microseconds>(std::chrono::steady_clock::now() - begun_));
     context_.counts.recordsAnswered(answer.recordsFound, answer.records.size() - answer.recordsFound,
                                     answer.recordsFromMemory);

@@ -19,6 +19,7 @@
 #include <string>
 
 #include "foundation/bytes.h"
+#include "lumora-local/client_certificate.h"
 #include "lumora-local/connection_table.h"
 #include "lumora-local/http_rules.h"
 #include "lumora-local/server.h"
@@ -27,7 +28,7 @@ namespace pinwell::lumora {
 
 /// What every connection of a server shares. Outlives them all.
 struct ConnectionContext {
-    const LookupService& lookups;
+    const HttpService& service;
     const TlsContext& tls;
     const Server::LogLine& accessLog;
     const Server::LogLine& errorLog;
@@ -60,6 +61,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
     enum class Phase { silent, reading, writing, closing };
 
     void handshake();
+    void logFailedHandshake(ErrorCode error) const;
     void awaitRequest();
     void beginRequest();
     void readMore();
@@ -68,6 +70,9 @@ class Connection : public std::enable_shared_from_this<Connection> {
     void continueThenRead();
     void onBody();
     void refuseUnreadable(ErrorCode error);
+    void refuse(int status, bool bodyLeftBehind);
+    RequestHead headOfRequest() const;
+    bool mayGoOn() const;
     void respond(const Answer& answer, bool bodyLeftBehind);
     void count(const Answer& answer) const;
     void log(const Answer& answer, std::size_t size, const std::string& identifier) const;
@@ -96,6 +101,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
     std::chrono::steady_clock::time_point deadline_;
     bool timerIsSet_ = false;
     std::string peer_;
+    std::optional<Client> client_;  // if the server asks for certificates
     ConnectionTable::Identifier identifier_ = 0;
     Phase phase_ = Phase::silent;
 

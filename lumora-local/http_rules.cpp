@@ -23,23 +23,6 @@ bool isNumber(const std::string& value) {
 
 }  // namespace
 
-Answer requestRefusal(int status) {
-    switch (status) {
-        case 408:
-            return refusal(408, "REQUEST_TIMEOUT", "The request took too long to arrive");
-        case 411:
-            return refusal(411, "LENGTH_REQUIRED", "A lookup says how long it is");
-        case 413:
-            return refusal(413, "PAYLOAD_TOO_LARGE", "The body is too large");
-        case 414:
-            return refusal(414, "URI_TOO_LONG", "The request's target is too long");
-        case 431:
-            return refusal(431, "HEADERS_TOO_LARGE", "The request's headers are too large");
-        default:
-            return refusal(400, "BAD_REQUEST", "The request is malformed");
-    }
-}
-
 bool announcesBody(const HttpRequest& request) {
     return request.count(http::field::transfer_encoding) > 0 ||
            (request.count(http::field::content_length) > 0 && request[http::field::content_length] != "0");
@@ -49,31 +32,37 @@ bool expectsContinue(const HttpRequest& request) {
     return boost::beast::iequals(request[http::field::expect], "100-continue");
 }
 
-std::optional<Answer> refuseHead(const HttpRequest& request) {
+std::optional<int> refuseHead(const HttpRequest& request) {
     const auto lengths = request.count(http::field::content_length);
     const auto codings = request.count(http::field::transfer_encoding);
     if (request.method() == http::verb::unknown || (request.version() != 11 && request.version() != 10)) {
-        return requestRefusal(400);
+        return 400;
     }
-    if (lengths > 1 || codings > 1 || (lengths > 0 && codings > 0)) return requestRefusal(400);
-    if (lengths == 1 && !isNumber(text(request[http::field::content_length]))) return requestRefusal(400);
+    if (lengths > 1 || codings > 1 || (lengths > 0 && codings > 0)) return 400;
+    if (lengths == 1 && !isNumber(text(request[http::field::content_length]))) return 400;
     if (codings == 1 && !boost::beast::iequals(request[http::field::transfer_encoding], "chunked")) {
-        return requestRefusal(400);
+        return 400;
     }
-    if (request.count(http::field::host) > 1) return requestRefusal(400);  // RFC 9112, 3.2
-    if (request.target().size() > kMaximumTargetLength) return requestRefusal(414);
+    if (request.count(http::field::host) > 1) return 400;  // RFC 9112, 3.2
+    if (request.target().size() > kMaximumTargetLength) return 414;
     return std::nullopt;
 }
 
-std::optional<Answer> refuseMissingLength(const HttpRequest& request) {
+std::optional<int> refuseMissingLength(const HttpRequest& request) {
     const bool said =
         request.count(http::field::transfer_encoding) + request.count(http::field::content_length) > 0;
-    return said ? std::nullopt : std::optional(requestRefusal(411));
+    return said ? std::nullopt : std::optional(411);
 }
 
 RequestHead headOf(const HttpRequest& request) {
-    return {text(request.method_string()), text(request.target()), text(request[http::field::host]),
-            text(request[http::field::content_type]), text(request[http::field::content_encoding])};
+    RequestHead head{text(request.method_string()), text(request.target()), text(request[http::field::host]),
+                     text(request[http::field::content_type]), text(request[http::field::content_encoding])};
+    const auto [first, end] = request.equal_range("Idempotency-Key");
+    for (auto field = first; field != end; ++field) {
+        head.idempotencyKey =
+            head.idempotencyKey ? *head.idempotencyKey + ", " + text(field->value()) : text(field->value());
+    }
+    return head;
 }
 
 }  // namespace pinwell::lumora

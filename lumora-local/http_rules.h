@@ -1,18 +1,16 @@
-// What the service demands of HTTP requests beyond what the parser checks, and the refusals that go with it.
+// What the service demands of HTTP requests beyond what the parser checks. Refusals are by status: 400, 408,
+// 411, 413, 414 or 431.
 #pragma once
 
 #include <boost/beast/http/message.hpp>
 #include <boost/beast/http/string_body.hpp>
 #include <optional>
 
-#include "lumora-local/lookup.h"
+#include "lumora-local/http_service.h"
 
 namespace pinwell::lumora {
 
 using HttpRequest = boost::beast::http::request<boost::beast::http::string_body>;
-
-/// The refusal with one of the statuses that a request itself can cause: 400, 408, 411, 413, 414, 431.
-Answer requestRefusal(int status);
 
 /// Whether a body comes after the head.
 bool announcesBody(const HttpRequest& request);
@@ -22,10 +20,10 @@ bool expectsContinue(const HttpRequest& request);
 
 /// For heads that no handler may see: an unknown method, a target that is too long, framing that two sides
 /// may read differently (RFC 9112, 6.3).
-std::optional<Answer> refuseHead(const HttpRequest& request);
+std::optional<int> refuseHead(const HttpRequest& request);
 
 /// For a request that must bring a body: refused unless it says where the body ends.
-std::optional<Answer> refuseMissingLength(const HttpRequest& request);
+std::optional<int> refuseMissingLength(const HttpRequest& request);
 
 RequestHead headOf(const HttpRequest& request);
 

@@ -26,10 +26,6 @@ constexpr std::string_view kFileNameToken = "${f}";
 constexpr std::size_t kAssetIdentifierLength = 64;  // SHA-256 in hexadecimal
 constexpr std::size_t kMaximumFileNameLength = 200;
 
-std::string_view pathOf(std::string_view target) {
-    return target.substr(0, target.find_first_of("?#"));
-}
-
 std::string json(const Value& value) {
     const foundation::Result<Data> document = foundation::serializeJSON(value);
     // What is said here is text of our own or text that came out of a JSON parser.
@@ -44,16 +40,6 @@ Answer methodNotAllowed(const char* allowed) {
     Answer answer = refusal(405, "METHOD_NOT_ALLOWED", format("The method here is %s", allowed));
     answer.headers.emplace_back("Allow", allowed);
     return answer;
-}
-
-/// Case and parameters of the media type do not count (RFC 9110, 8.3.1).
-bool isJson(std::string_view contentType) {
-    std::string_view type = contentType.substr(0, contentType.find(';'));
-    while (!type.empty() && (type.back() == ' ' || type.back() == '\t')) type.remove_suffix(1);
-    constexpr std::string_view kWanted = "application/json";
-    return std::equal(type.begin(), type.end(), kWanted.begin(), kWanted.end(), [](char given, char wanted) {
-        return given == wanted || (given >= 'A' && given <= 'Z' && given - 'A' + 'a' == wanted);
-    });
 }
 
 /// Between the prefix and the suffix stand the container and the environment.
@@ -150,12 +136,29 @@ Answer refusalForNow(std::string_view reason) {
     return answer;
 }
 
-RequestKind kindOfTarget(std::string_view target) {
+RequestKind LookupService::kindOf(std::string_view target) const {
     const std::string_view path = pathOf(target);
     if (path == kHealthPath) return RequestKind::health;
     if (path == kReadyPath) return RequestKind::readiness;
     if (path.starts_with(kAssetPrefix)) return RequestKind::asset;
     return environmentOfLookup(path) ? RequestKind::lookup : RequestKind::other;
+}
+
+Answer LookupService::refuse(int status, const RequestHead*) const {
+    switch (status) {
+        case 408:
+            return refusal(408, "REQUEST_TIMEOUT", "The request took too long to arrive");
+        case 411:
+            return refusal(411, "LENGTH_REQUIRED", "A lookup says how long it is");
+        case 413:
+            return refusal(413, "PAYLOAD_TOO_LARGE", "The body is too large");
+        case 414:
+            return refusal(414, "URI_TOO_LONG", "The request's target is too long");
+        case 431:
+            return refusal(431, "HEADERS_TOO_LARGE", "The request's headers are too large");
+        default:
+            return refusal(400, "BAD_REQUEST", "The request is malformed");
+    }
 }
 
 std::optional<Answer> LookupService::answerHead(const RequestHead& head) const {

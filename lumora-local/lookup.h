@@ -27,40 +27,18 @@
 #include "foundation/bytes.h"
 #include "lumora-local/answer_cache.h"
 #include "lumora-local/endpoint.h"
+#include "lumora-local/http_service.h"
 #include "lumora-local/record_store.h"
 #include "lumora-local/service_counts.h"
 
 namespace pinwell::lumora {
 
 inline constexpr std::string_view kContainer = "com.ostrel.tm.ticket-delivery";
-inline constexpr std::size_t kMaximumBodySize = 1024 * 1024;
 inline constexpr std::size_t kMaximumRecordsPerRequest = 200;
 inline constexpr std::size_t kMaximumRecordNameLength = 255;
 
 /// A lookup whose answer would be longer is refused: its client asks for fewer records at a time.
 inline constexpr std::size_t kMaximumAnswerSize = 8 * 1024 * 1024;
-
-/// A request up to its body. `target` is as it stood in the request line; header values are empty when
-/// absent.
-struct RequestHead {
-    std::string method;
-    std::string target;
-    std::string host;
-    std::string contentType;
-    std::string contentEncoding;
-};
-
-struct Answer {
-    int status = 200;
-    std::string contentType = "application/json";
-    std::string body;
-    std::shared_ptr<const foundation::Data>
-        asset;  // in the place of `body`; downloads of one ticket share it
-    std::vector<std::pair<std::string, std::string>> headers;
-    std::vector<std::string> records;   // the names that were looked up, for the log
-    std::size_t recordsFound = 0;       // of them
-    std::size_t recordsFromMemory = 0;  // of those found
-};
 
 /// A refusal in the form that all refusals have.
 Answer refusal(int status, std::string_view code, std::string_view reason);
@@ -72,10 +50,7 @@ Answer refusalForNow(std::string_view reason);
 /// any thread.
 using Obstacle = std::function<std::optional<std::string>()>;
 
-/// For counting. Says nothing about what the answer will be.
-RequestKind kindOfTarget(std::string_view target);
-
-class LookupService {
+class LookupService final : public HttpService {
   public:
     /// `hosts` are the names that the server's certificate speaks for; `fallback` is where the service can be
     /// reached when a request does not say by which of them it came.
@@ -88,10 +63,17 @@ class LookupService {
 
     /// The answer as far as the head decides it; nothing when the body must be read and handed to
     /// answerLookup. From any thread.
-    std::optional<Answer> answerHead(const RequestHead& head) const;
+    std::optional<Answer> answerHead(const RequestHead& head) const override;
 
     /// The answer to a lookup whose head was accepted. From any thread.
     Answer answerLookup(const RequestHead& head, std::string_view body) const;
+    Answer answerBody(const RequestHead& head, std::string_view body) const override {
+        return answerLookup(head, body);
+    }
+
+    Answer refuse(int status, const RequestHead* head) const override;
+    Answer refuseForNow(std::string_view reason) const override { return refusalForNow(reason); }
+    RequestKind kindOf(std::string_view target) const override;
 
   private:
     struct Found {

@@ -15,6 +15,7 @@
 #include "lumora-local/certificate_dates.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
+#include "lumora-local/lookup.h"
 #include "lumora-local/metrics.h"
 #include "lumora-local/metrics_listener.h"
 #include "lumora-local/passphrase.h"

@@ -147,9 +147,9 @@ void work(asio::io_context& context, const Server::LogLine& errorLog) {
 
 }  // namespace
 
-Server::Server(const LookupService& lookups, const TlsContext& context, LogLine accessLog, LogLine errorLog,
+Server::Server(const HttpService& service, const TlsContext& context, LogLine accessLog, LogLine errorLog,
                const ServerLimits& limits, LogForm form, ServiceCounts* counts)
-    : lookups_(lookups),
+    : service_(service),
       context_(context),
       accessLog_(std::move(accessLog)),
       errorLog_(std::move(errorLog)),
@@ -161,7 +161,7 @@ void Server::run(Listener& listener, int stopDescriptor, const std::vector<Watch
     const std::size_t workers = workersFor(limits_);
     ConnectionTable table(limits_.connectionsPerAddress);
     std::atomic<bool> stopping{false};
-    ConnectionContext shared{lookups_, context_, accessLog_, errorLog_, limits_,
+    ConnectionContext shared{service_, context_, accessLog_, errorLog_, limits_,
                              form_,    table,    stopping,   counts_};
     asio::io_context context(static_cast<int>(workers));
 

@@ -1,4 +1,4 @@
-// Serving the protocol over HTTPS: connections, worker threads, limits and the access log.
+// Serving over HTTPS: connections, worker threads, limits and the access log.
 #pragma once
 
 #include <chrono>
@@ -7,8 +7,8 @@
 #include <vector>
 
 #include "lumora-local/access_log.h"
+#include "lumora-local/http_service.h"
 #include "lumora-local/listener.h"
-#include "lumora-local/lookup.h"
 #include "lumora-local/service_counts.h"
 #include "lumora-local/tls_context.h"
 
@@ -38,7 +38,7 @@ class Server {
     /// References must outlive the server. `accessLog` gets one line per request, `errorLog` one for each
     /// request that failed through our own fault; both come from any worker, several at a time. What
     /// happens is counted in `counts`, if it is there.
-    Server(const LookupService& lookups, const TlsContext& context, LogLine accessLog, LogLine errorLog,
+    Server(const HttpService& service, const TlsContext& context, LogLine accessLog, LogLine errorLog,
            const ServerLimits& limits = {}, LogForm form = LogForm::text, ServiceCounts* counts = nullptr);
 
     /// Serves until `stopDescriptor` is readable (which nobody may undo), then refuses new connections, lets
@@ -47,7 +47,7 @@ class Server {
     void run(Listener& listener, int stopDescriptor, const std::vector<Watch>& watches = {});
 
   private:
-    const LookupService& lookups_;
+    const HttpService& service_;
     const TlsContext& context_;
     LogLine accessLog_;
     LogLine errorLog_;

@@ -5,6 +5,7 @@
 #include <boost/asio/ssl/context.hpp>
 
 #include "foundation/format.h"
+#include "lumora-local/client_certificate.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/key_file.h"
 #include "lumora-local/openssl_handles.h"
@@ -32,6 +33,10 @@ std::shared_ptr<boost::asio::ssl::context> load(const TlsFiles& files) {
     const KeyHandle key = readKeyFile(files.key, files.passphraseFile);
     require(SSL_CTX_use_PrivateKey(native, key.get()) == 1, "use the key in " + files.key);
     require(SSL_CTX_check_private_key(native) == 1, "use the key in " + files.key);
+    if (!files.clientAuthorities.empty()) {
+        requireRegularFile(files.clientAuthorities);
+        askForClients(native, files.clientAuthorities);
+    }
     return context;
 }
 

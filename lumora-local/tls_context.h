@@ -12,11 +12,13 @@ class context;
 namespace pinwell::lumora {
 
 /// PEM files: the certificate chain with the server's certificate first, and its key, which the passphrase at
-/// `passphraseFile` (passphrase.h) opens if it is encrypted.
+/// `passphraseFile` (passphrase.h) opens if it is encrypted. With `clientAuthorities`, a file with their
+/// certificates, each client has to show a certificate (client_certificate.h).
 struct TlsFiles {
     std::string certificate;
     std::string key;
     std::string passphraseFile{};
+    std::string clientAuthorities{};
 };
 
 /// TLS 1.2 or later, without renegotiation and compression. May be used from any thread.
@@ -33,6 +35,9 @@ class TlsContext {
     /// it was then.
     void reload(const TlsFiles& files);
     void reload() { reload(files_); }
+
+    /// Whether each client has to show a certificate.
+    bool asksForClients() const noexcept { return !files_.clientAuthorities.empty(); }
 
   private:
     TlsFiles files_;

@@ -13,6 +13,7 @@
 #include <thread>
 #include <vector>
 
+#include "lumora-local/lookup.h"
 #include "lumora-local/server.h"
 #include "lumora-local/sqlite_store.h"
 #include "running_service.h"
