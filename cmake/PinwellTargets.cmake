@@ -14,12 +14,14 @@ function(pinwell_executable name)
   target_link_libraries(${name} PRIVATE pinwell_warnings pinwell_hardening pinwell_sanitizers)
 endfunction()
 
-# pinwell_test(NAME [WHOLE] [SHARDS COUNT] [SLOW] [TIMEOUT SECONDS] SOURCES...): a GoogleTest program; every test in it is
+# pinwell_test(NAME [WHOLE] [SHARDS COUNT] [SLOW] [THREADS] [TIMEOUT SECONDS] SOURCES...): a GoogleTest program; every test in it is
 # a ctest of its own, or, with WHOLE, the program is one: for tables of many quick rows. PINWELL_WHOLE_TESTS makes all of
 # a folder so. SHARDS splits a whole program into that many, which run side by side.
 # SLOW gives its tests the label "slow": they are left out after an edit (scripts/test), and run for a release.
+# THREADS gives a whole program the label "threads", and makes the target "threaded_tests" build it: what it tests runs in
+# several threads, and is run under ThreadSanitizer.
 function(pinwell_test name)
-  cmake_parse_arguments(PARSE_ARGV 1 test "WHOLE;SLOW" "TIMEOUT;SHARDS" "")
+  cmake_parse_arguments(PARSE_ARGV 1 test "WHOLE;SLOW;THREADS" "TIMEOUT;SHARDS" "")
   if(PINWELL_WHOLE_TESTS OR test_SHARDS)
     set(test_WHOLE TRUE)
   endif()
@@ -29,8 +31,19 @@ function(pinwell_test name)
     set(test_TIMEOUT 120)
   endif()
   set(properties TIMEOUT ${test_TIMEOUT})
+  set(labels)
   if(test_SLOW)
-    list(APPEND properties LABELS slow)
+    list(APPEND labels slow)
+  endif()
+  if(test_THREADS)
+    if(NOT test_WHOLE)
+      message(FATAL_ERROR "${name}: THREADS is for whole programs")
+    endif()
+    list(APPEND labels threads)
+    if(NOT TARGET threaded_tests)
+      add_custom_target(threaded_tests)
+    endif()
+    add_dependencies(threaded_tests ${name})
   endif()
   add_executable(${name} ${test_UNPARSED_ARGUMENTS})
   set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/tests)
@@ -42,13 +55,14 @@ function(pinwell_test name)
       math(EXPR index "${shard} - 1")
       add_test(NAME ${name}.${shard} COMMAND ${name})
       set_tests_properties(${name}.${shard} PROPERTIES ${properties}
-        ENVIRONMENT "GTEST_TOTAL_SHARDS=${test_SHARDS};GTEST_SHARD_INDEX=${index}")
+        ENVIRONMENT "GTEST_TOTAL_SHARDS=${test_SHARDS};GTEST_SHARD_INDEX=${index}" LABELS "${labels}")
     endforeach()
   elseif(test_WHOLE)
     add_test(NAME ${name} COMMAND ${name})
-    set_tests_properties(${name} PROPERTIES ${properties})
+    set_tests_properties(${name} PROPERTIES ${properties} LABELS "${labels}")
   else()
     # By the names of parameters: their values may be long, or hold bytes that differ from run to run.
-    gtest_discover_tests(${name} NO_PRETTY_VALUES DISCOVERY_MODE PRE_TEST PROPERTIES ${properties})
+    gtest_discover_tests(${name} NO_PRETTY_VALUES DISCOVERY_MODE PRE_TEST PROPERTIES ${properties}
+      LABELS "${labels}")
   endif()
 endfunction()
