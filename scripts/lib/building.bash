@@ -19,19 +19,19 @@ first_errors() {
 # last_step LOG: how far a build has come, in ninja's own words.
 last_step() { grep -aE '^\[[0-9]+/[0-9]+\] ' "$1" 2> /dev/null | tail -n 1; }
 
-# watch_build LOG: shows the last step of a build, on a terminal in place and elsewhere once a minute. Runs until it is
-# ended.
+# watch_build LOG: shows the last step of a build, on a terminal in place and elsewhere once a minute. Runs until its input
+# ends. (It is not ended by a signal: bash would run the traps of the script that has started it.)
 watch_build() {
   local step shown='' seconds=0 columns
   if [ -t 1 ]; then
     columns=$(tput cols 2> /dev/null || echo 80)
-    while sleep 0.3; do
+    while goes_on 0.3; do
       step=$(last_step "$1")
       [ "$step" = "$shown" ] || printf '\r\033[K%s' "${step:0:$((columns - 1))}"
       shown=$step
     done
   else
-    while sleep 1; do
+    while goes_on 1; do
       seconds=$((seconds + 1))
       [ $((seconds % 60)) -eq 0 ] || continue
       step=$(last_step "$1")
@@ -40,18 +40,26 @@ watch_build() {
   fi
 }
 
+# goes_on SECONDS: waits so long, and fails as soon as the input ends.
+goes_on() {
+  local code=0
+  read -r -t "$1" || code=$?
+  [ $code -gt 128 ]
+}
+
 # build_preset PRESET [OPTION...] [TARGET...]: configures, with options of cmake that begin with -D, and builds;
 # build/PRESET/build.log has all that was said. Ends with the first errors and the log's name, and with 1, when it fails.
 build_preset() {
-  local preset=$1 log=build/$1/build.log watcher status=0 options=()
+  local preset=$1 log=build/$1/build.log building watcher status=0 options=()
   shift
   while [[ ${1:-} == -D* ]]; do options+=("$1") && shift; done
   mkdir -p "build/$preset"
   : > "$log"
-  watch_build "$log" &
+  exec {building}> >(watch_build "$log")
   watcher=$!
-  { cmake --preset "$preset" "${options[@]}" && cmake --build --preset "$preset" ${1:+--target "$@"}; } > "$log" 2>&1 || status=1
-  kill $watcher 2> /dev/null || true
+  { cmake --preset "$preset" "${options[@]}" && cmake --build --preset "$preset" ${1:+--target "$@"}; } \
+    > "$log" 2>&1 {building}>&- || status=1
+  exec {building}>&-
   wait $watcher 2> /dev/null || true
   [ ! -t 1 ] || printf '\r\033[K'
   [ $status -ne 0 ] || return 0
