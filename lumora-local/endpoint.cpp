@@ -9,7 +9,7 @@
 namespace pinwell::lumora {
 namespace {
 
-constexpr std::size_t kMaximumNameLength = 253;
+constexpr std::size_t kMaximumHostLength = 253;
 constexpr std::size_t kMaximumLabelLength = 63;
 
 std::optional<std::string> canonicalAddress(const std::string& text) {
@@ -39,7 +39,7 @@ bool isDigit(char c) {
 }
 
 bool isName(std::string_view text) {
-    if (text.empty() || text.size() > kMaximumNameLength) return false;
+    if (text.empty() || text.size() > kMaximumHostLength) return false;
     std::string_view lastLabel;
     for (std::size_t start = 0; start <= text.size();) {
         const std::size_t end = std::min(text.find('.', start), text.size());

@@ -1,6 +1,7 @@
 #include "lumora-local/lookup.h"
 
 #include <algorithm>
+#include <span>
 #include <unordered_map>
 
 #include "foundation/base64.h"
@@ -25,6 +26,9 @@ constexpr std::string_view kReadyPath = "/readyz";
 constexpr std::string_view kFileNameToken = "${f}";
 constexpr std::size_t kAssetIdentifierLength = 64;  // SHA-256 in hexadecimal
 constexpr std::size_t kMaximumFileNameLength = 200;
+
+// A question to a database costs a message there and back. The tickets that come back are in memory at once.
+constexpr std::size_t kNamesAtOnce = 16;
 
 std::string json(const Value& value) {
     const foundation::Result<Data> document = foundation::serializeJSON(value);
@@ -193,17 +197,17 @@ Answer LookupService::answerLookup(const RequestHead& head, std::string_view bod
     }
     LookupBody request = parseLookupBody(body);
     if (request.refused) return *std::move(request.refused);
-    // A name that comes again is looked up once. Answers share what they repeat until they are put together.
-    std::unordered_map<std::string_view, Found> found;
+    const std::optional<FoundByName> found = findRecords(head, *environment, request.names, state);
+    if (!found) return answerTooLarge();
+    // Answers share what they repeat until they are put together.
     constexpr std::string_view kBegin = "{\"records\":[";
     constexpr std::string_view kEnd = "]}";
     std::size_t size = kBegin.size() + kEnd.size();
     bool isForAll = true;
     for (const std::string& name : request.names) {
-        auto [entry, fresh] = found.try_emplace(name);
-        if (fresh) entry->second = findRecord(head, *environment, name, state);
-        isForAll = isForAll && entry->second.isForAll;
-        size += entry->second.record->text.size() + 1;
+        const Found& entry = found->at(name);
+        isForAll = isForAll && entry.isForAll;
+        size += entry.record->text.size() + 1;
         if (size > kMaximumAnswerSize) return answerTooLarge();
     }
     answer.body.reserve(size);
@@ -211,7 +215,7 @@ Answer LookupService::answerLookup(const RequestHead& head, std::string_view bod
     std::string_view separator;
     for (const std::string& name : request.names) {
         answer.body += separator;
-        const Found& entry = found.at(name);
+        const Found& entry = found->at(name);
         answer.body += entry.record->text;
         answer.recordsFound += entry.isKnown ? 1U : 0U;
         answer.recordsFromMemory += entry.fromMemory ? 1U : 0U;
@@ -226,19 +230,42 @@ Answer LookupService::answerLookup(const RequestHead& head, std::string_view bod
     return answer;
 }
 
+/// A name that comes again is looked up once. `nullopt` if the records together are too large for an answer.
+std::optional<LookupService::FoundByName> LookupService::findRecords(
+    const RequestHead& head, Environment environment, const std::vector<std::string>& names,
+    std::optional<std::uint64_t> state) const {
+    FoundByName found;
+    std::vector<std::string> missing;
+    for (const std::string& name : names) {
+        auto [entry, fresh] = found.try_emplace(name);
+        if (!fresh) continue;
+        if (state) entry->second = {records_.find(*state, environment, name), true, true, true};
+        if (entry->second.record == nullptr) missing.push_back(name);
+    }
+    std::size_t size = 0;
+    for (std::span<const std::string> rest = missing; !rest.empty();) {
+        const auto group = rest.first(std::min(rest.size(), kNamesAtOnce));
+        const std::vector<std::optional<Delivery>> deliveries = source_.findTickets(environment, group);
+        for (std::size_t i = 0; i < group.size(); ++i) {
+            Found record = makeRecord(head, environment, group[i], deliveries.at(i), state);
+            size += record.record->text.size();
+            found.at(group[i]) = std::move(record);
+        }
+        if (size > kMaximumAnswerSize) return std::nullopt;
+        rest = rest.subspan(group.size());
+    }
+    return found;
+}
+
 /// A record as it is in an answer. Kept is only what is the same for all who ask: an asset's URL has the name
 /// by which its client came, and anybody can ask for names that are not there.
-LookupService::Found LookupService::findRecord(const RequestHead& head, Environment environment,
+LookupService::Found LookupService::makeRecord(const RequestHead& head, Environment environment,
                                                const std::string& name,
+                                               const std::optional<Delivery>& delivery,
                                                std::optional<std::uint64_t> state) const {
-    if (state) {
-        if (auto known = records_.find(*state, environment, name))
-            return {std::move(known), true, true, true};
-    }
     const auto share = [](const Value& record) {
         return std::make_shared<const KeptAnswer>(KeptAnswer{json(record)});
     };
-    const std::optional<Delivery> delivery = source_.findTicket(environment, name);
     if (delivery && delivery->inlineTicket) {
         auto record = share(
             foundRecord(name, "signedTicket", "BYTES", foundation::encodeBase64(*delivery->inlineTicket)));

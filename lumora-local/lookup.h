@@ -82,8 +82,12 @@ class LookupService final : public HttpService {
         bool isKnown = false;
         bool fromMemory = false;
     };
-    Found findRecord(const RequestHead& head, Environment environment, const std::string& name,
-                     std::optional<std::uint64_t> state) const;
+    using FoundByName = std::unordered_map<std::string_view, Found>;
+    std::optional<FoundByName> findRecords(const RequestHead& head, Environment environment,
+                                           const std::vector<std::string>& names,
+                                           std::optional<std::uint64_t> state) const;
+    Found makeRecord(const RequestHead& head, Environment environment, const std::string& name,
+                     const std::optional<Delivery>& delivery, std::optional<std::uint64_t> state) const;
     Answer answerAsset(std::string_view path) const;
     std::shared_ptr<const foundation::Data> sharedAsset(const std::string& identifier) const;
     Answer answerHealth() const;

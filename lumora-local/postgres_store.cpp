@@ -99,6 +99,18 @@ std::optional<std::string> revokedBeside(PostgresConnection& connection, Environ
     return rows.text(0, 0);
 }
 
+/// Of the columns `asset, length(ticket), ticket`, from `column` on; the last may be NULL for an asset.
+Delivery readDelivery(const PostgresRows& rows, std::size_t row, int column) {
+    Delivery delivery;
+    if (rows.isNull(row, column)) {
+        delivery.inlineTicket = foundation::toData(rows.bytes(row, column + 2));
+    } else {
+        delivery.asset = Delivery::Asset{rows.text(row, column),
+                                         static_cast<std::uint64_t>(rows.integer(row, column + 1))};
+    }
+    return delivery;
+}
+
 void requireName(const std::string& name) {
     if (!canNameARecord(name)) throw Failure(EX_DATAERR, format("%@ is not the name of a record", name));
 }
@@ -260,14 +272,33 @@ std::optional<Delivery> PostgresStore::findTicket(Environment environment, const
             " FROM record WHERE environment = $1 AND name = $2",
             {nameOf(environment), recordName}, deadline);
         if (rows.size() == 0) return std::nullopt;
-        Delivery delivery;
-        if (rows.isNull(0, 0)) {
-            delivery.inlineTicket = foundation::toData(rows.bytes(0, 2));
-        } else {
-            delivery.asset = Delivery::Asset{rows.text(0, 0), static_cast<std::uint64_t>(rows.integer(0, 1))};
-        }
-        return delivery;
+        return readDelivery(rows, 0, 0);
     });
+}
+
+std::vector<std::optional<Delivery>> PostgresStore::findTickets(Environment environment,
+                                                                std::span<const std::string> recordNames) {
+    if (recordNames.size() == 1) return {findTicket(environment, recordNames.front())};
+    std::vector<std::optional<Delivery>> found(recordNames.size());
+    PostgresArray names;
+    for (const std::string& name : recordNames) {
+        if (canNameARecord(name)) {
+            names.text(name);
+        } else {
+            names.null();
+        }
+    }
+    reading([&](PostgresConnection& connection, Deadline deadline) {
+        const PostgresRows rows = connection.query(
+            "SELECT asked.place, r.asset, length(r.ticket), CASE WHEN r.asset IS NULL THEN r.ticket END"
+            " FROM unnest($2::text[]) WITH ORDINALITY AS asked (name, place)"
+            " JOIN record r ON r.environment = $1 AND r.name = asked.name",
+            {nameOf(environment), names.parameter()}, deadline);
+        for (std::size_t row = 0; row < rows.size(); ++row) {
+            found.at(static_cast<std::size_t>(rows.integer(row, 0) - 1)) = readDelivery(rows, row, 1);
+        }
+    });
+    return found;
 }
 
 std::optional<Data> PostgresStore::findAsset(const std::string& identifier) {
@@ -287,9 +318,9 @@ std::size_t PostgresStore::countRecords() {
     });
 }
 
-/// Runs work within a transaction that has the store's lock, again if the connection is lost. By the outcome's
-/// event it is known whether a commit without an answer took place. What the work changed is on the server's
-/// disk when this returns.
+/// Runs work within a transaction that has the store's lock, again if the connection is lost. By the
+/// outcome's event it is known whether a commit without an answer took place. What the work changed is on the
+/// server's disk when this returns.
 PutOutcome PostgresStore::changing(const std::function<PutOutcome(PostgresConnection&, Deadline)>& work) {
     const Deadline deadline = Clock::now() + kChangingTime;
     for (;;) {

@@ -6,6 +6,7 @@
 #include <cstdint>
 #include <functional>
 #include <optional>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -35,6 +36,15 @@ class RecordSource {
     virtual ~RecordSource() = default;
 
     virtual std::optional<Delivery> findTicket(Environment environment, const std::string& recordName) = 0;
+
+    /// For each name what findTicket() finds, in their order. All of it is in memory at once, so whoever asks
+    /// bounds the number of names.
+    virtual std::vector<std::optional<Delivery>> findTickets(Environment environment,
+                                                             std::span<const std::string> recordNames) {
+        std::vector<std::optional<Delivery>> found;
+        for (const std::string& name : recordNames) found.push_back(findTicket(environment, name));
+        return found;
+    }
 
     /// The ticket behind an asset identifier. A record that is replaced takes its asset along, so a revoked
     /// record's earlier ticket is no longer delivered.

@@ -122,6 +122,33 @@ TEST_P(RecordStoreTest, ListsByName) {
     EXPECT_EQ(store.countRecords(), 2U);
 }
 
+TEST_P(RecordStoreTest, FindsManyTicketsInTheOrderOfTheirNames) {
+    RecordStore& store = openAndKeep();
+    SignedRecord asset = makeRecord("b", "second");
+    asset.record.asAsset = true;
+    store.put(kProduction, {makeRecord("a", "first"), asset}, kOccasion);
+    store.put(Environment::development, {makeRecord("c", "elsewhere")}, kOccasion);
+    const std::vector<std::string> names{"b",
+                                         "c",
+                                         "",
+                                         "a",
+                                         "b",
+                                         "no\xff"
+                                         "name",
+                                         "{\"a\"}",
+                                         "a\\"};
+    const auto found = store.findTickets(kProduction, names);
+    ASSERT_EQ(found.size(), names.size());
+    ASSERT_TRUE(found[0] && found[0]->asset && found[4] && found[4]->asset);
+    EXPECT_EQ(found[0]->asset->size, 6U);
+    EXPECT_EQ(found[4]->asset->identifier, found[0]->asset->identifier);
+    ASSERT_TRUE(found[3]);
+    EXPECT_EQ(found[3]->inlineTicket, foundation::toData("first"));
+    for (const std::size_t none : {1U, 2U, 5U, 6U, 7U}) EXPECT_FALSE(found[none]) << names[none];
+    EXPECT_TRUE(store.findTickets(kProduction, {}).empty());
+    EXPECT_TRUE(store.findTickets(kProduction, std::vector<std::string>{"a"}).front());
+}
+
 TEST_P(RecordStoreTest, TellsHowManyRecordsAndEventsItHas) {
     RecordStore& store = openAndKeep();
     EXPECT_EQ(store.facts().records, 0U);

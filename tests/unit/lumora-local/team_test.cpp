@@ -1,14 +1,17 @@
 // Several instances of the service on one database, one or the other of which is killed.
 #include <gtest/gtest.h>
+#include <httplib.h>
 
 #include <filesystem>
 #include <memory>
 
+#include "foundation/base64.h"
 #include "foundation/format.h"
 #include "lumora-local/history.h"
 #include "lumora-local/postgres_store.h"
 #include "lumora-local/service_place.h"
 #include "postgres_cluster.h"
+#include "running_service.h"
 #include "serving_instance.h"
 
 namespace pinwell::lumora {
@@ -79,6 +82,40 @@ TEST_F(Team, LosesNothingWhenTheDatabaseIsKilledUnderLoad) {
     EXPECT_GT(load.counts().retriable, 0U);
     const ProcessResult verified = test::runLumora({"log", service_, "--verify"});
     EXPECT_EQ(verified.exitStatus, 0) << verified.errors;
+}
+
+TEST_F(Team, SeesEachRevocationThroughEveryInstanceOnceItIsAcknowledged) {
+    const std::vector<std::string> names{"2/2/00000000000000000000000000000000000000aa",
+                                         "2/2/00000000000000000000000000000000000000bb"};
+    const ServingInstance first(service_);
+    const ServingInstance second(service_);
+    std::vector<std::unique_ptr<httplib::SSLClient>> clients;
+    clients.push_back(test::clientOf(service_, first.port()));
+    clients.push_back(test::clientOf(service_, second.port()));
+    const std::string one = R"({"recordName":")" + names[0] + R"("})";
+    const std::string both = one + R"(,{"recordName":")" + names[1] + R"("})";
+    PostgresStore store(place_);
+    const Occasion occasion{foundation::Date{100}, "tester", std::nullopt, "", true};
+    for (int state = 1; state <= 40; ++state) {
+        const std::string ticket = "ticket " + std::to_string(state);
+        std::vector<SignedRecord> records;
+        for (const std::string& name : names) {
+            records.push_back({{name, "made up", {}, state % 2 == 0, false, foundation::Date{state}},
+                               foundation::toData(ticket)});
+        }
+        store.put(Environment::production, records, occasion);
+        for (const auto& client : clients) {
+            for (const std::string& asked : {one, both}) {
+                const auto answer =
+                    client->Post(test::kLookupPath, R"({"records":[)" + asked + "]}", "application/json");
+                ASSERT_TRUE(answer);
+                ASSERT_EQ(answer->status, 200);
+                EXPECT_NE(answer->body.find(foundation::encodeBase64(foundation::toData(ticket))),
+                          std::string::npos)
+                    << answer->body << " is older than " << ticket;
+            }
+        }
+    }
 }
 
 /// HAProxy with the configuration of the documents, whose addresses are those of this test.
