@@ -12,7 +12,7 @@ pkg_check_modules(RE2 REQUIRED IMPORTED_TARGET re2)
 pkg_check_modules(SECCOMP REQUIRED IMPORTED_TARGET libseccomp>=2.5)
 
 # Single companions alone.
-if(PINWELL_GATE)
+if(PINWELL_GATE OR PINWELL_LUMORA)
   find_path(TOMLPLUSPLUS_INCLUDE_DIR toml++/toml.h REQUIRED)  # a header
 endif()
 if(PINWELL_INSPECT OR PINWELL_GATE OR PINWELL_LUMORA)

@@ -5,12 +5,12 @@
 #define TOML_EXCEPTIONS 0
 #include <toml++/toml.h>
 
-#include <algorithm>
 #include <optional>
 
 #include "foundation/bytes.h"
 #include "foundation/file_io.h"
 #include "foundation/format.h"
+#include "foundation/toml_keys.h"
 #include "gate/policy.h"
 
 namespace pinwell::gate {
@@ -19,62 +19,8 @@ using foundation::format;
 
 namespace {
 
-/// Parts of a dotted key; none of ours has two. The parser has no limit of its own: it makes a table for each
-/// part, and frees tables inside one another by recursion. (Of arrays and inline tables it takes 256.)
+/// Parts of a dotted key; none of ours has two.
 constexpr unsigned kMaximumKeyParts = 4;
-
-/// Looks for keys of too many parts, outside of strings and comments. What follows an unfinished string is
-/// left alone: the parser does not get there.
-class KeyScan {
-  public:
-    explicit KeyScan(std::string_view document) : rest_(document) {}
-
-    /// The line of the first one; `nullopt` if there is none.
-    std::optional<unsigned> run() {
-        while (!rest_.empty()) {
-            const char c = rest_.front();
-            if (c == '"' || c == '\'') {
-                if (!skipString(c)) return std::nullopt;
-                continue;
-            }
-            if (c == '#') {
-                rest_.remove_prefix(std::min(rest_.find('\n'), rest_.size()));
-                continue;
-            }
-            if (c == '.' && ++dots_ == kMaximumKeyParts) return line_;
-            if (std::string_view("\n=,[]{}").find(c) != std::string_view::npos) dots_ = 0;
-            if (c == '\n') ++line_;
-            rest_.remove_prefix(1);
-        }
-        return std::nullopt;
-    }
-
-  private:
-    /// False if it has no end.
-    bool skipString(char quote) {
-        const std::string three(3, quote);
-        const bool isLong = rest_.starts_with(three);
-        rest_.remove_prefix(isLong ? 3 : 1);
-        while (!rest_.empty()) {
-            const char c = rest_.front();
-            if (isLong ? rest_.starts_with(three) : c == quote) {
-                rest_.remove_prefix(isLong ? 3 : 1);
-                // Up to two more of them belong to a long string.
-                for (int i = 0; isLong && i < 2 && rest_.starts_with(quote); ++i) rest_.remove_prefix(1);
-                return true;
-            }
-            if (c == '\n' && !isLong) return false;
-            const bool isEscape = c == '\\' && quote == '"' && rest_.size() > 1;
-            if (rest_[isEscape ? 1 : 0] == '\n') ++line_;
-            rest_.remove_prefix(isEscape ? 2 : 1);
-        }
-        return false;
-    }
-
-    std::string_view rest_;
-    unsigned line_ = 1;
-    unsigned dots_ = 0;
-};
 
 /// Tables inside one another have no meaning here.
 class PolicyReader {
@@ -142,7 +88,7 @@ Policy readPolicyFile(const std::string& path) {
     if (!document) throw PolicyError(format("%@: %@", path, document.error().localizedFailureReason()));
     PolicyReader reader(path);
     const std::string text = foundation::toString(*document);
-    if (const auto line = KeyScan(text).run())
+    if (const auto line = foundation::lineOfLongTomlKey(text, kMaximumKeyParts))
         throw PolicyError(format("%@:%u: a key of more than %u parts", path, *line, kMaximumKeyParts));
     const toml::parse_result parsed = toml::parse(std::string_view(text), path);
     if (!parsed) reader.refuse(parsed.error().source(), std::string(parsed.error().description()));

@@ -26,24 +26,29 @@ std::string jsonLine(Dictionary members) {
 
 std::string describeRequest(const RequestEntry& entry, LogForm form) {
     if (form == LogForm::text) {
-        return foundation::format("%@ %s \"%s %s\" %d %zu %s", entry.time, entry.peer, entry.method,
-                                  entry.target, entry.status, entry.size, entry.identifier);
+        std::string line =
+            foundation::format("%@ %s \"%s %s\" %d %zu %s", entry.time, entry.peer, entry.method,
+                               entry.target, entry.status, entry.size, entry.identifier);
+        if (!entry.client.empty()) line += foundation::format(" \"%@\"", entry.client);
+        return line;
     }
     Array records;
     if (entry.records != nullptr) {
         for (const std::string& name : *entry.records) records.emplace_back(printable(name));
     }
-    return jsonLine({{"time", toRfc3339(entry.time)},
-                     {"level", "info"},
-                     {"message", "request"},
-                     {"peer", entry.peer},
-                     {"method", printable(entry.method)},
-                     {"target", printable(entry.target)},
-                     {"status", entry.status},
-                     {"bytes", std::uint64_t{entry.size}},
-                     {"request", entry.identifier},
-                     {"records", std::move(records)},
-                     {"microseconds", std::int64_t{entry.duration.count()}}});
+    Dictionary members{{"time", toRfc3339(entry.time)},
+                       {"level", "info"},
+                       {"message", "request"},
+                       {"peer", entry.peer},
+                       {"method", printable(entry.method)},
+                       {"target", printable(entry.target)},
+                       {"status", entry.status},
+                       {"bytes", std::uint64_t{entry.size}},
+                       {"request", entry.identifier},
+                       {"records", std::move(records)},
+                       {"microseconds", std::int64_t{entry.duration.count()}}};
+    if (!entry.client.empty()) members["client"] = printable(entry.client);
+    return jsonLine(std::move(members));
 }
 
 std::string messageAsJson(foundation::Date time, std::string_view level, std::string_view message) {

@@ -19,6 +19,7 @@ enum class LogForm {
 struct RequestEntry {
     foundation::Date time;
     std::string_view peer;
+    std::string_view client;  // common name of its certificate; empty if the server asks for none
     std::string_view method;  // empty if the head could not be read
     std::string_view target;
     int status = 0;

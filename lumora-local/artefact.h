@@ -16,6 +16,9 @@ struct Artefact {
     std::vector<CodeHash> hashes;
 };
 
+/// Whether a ticket for an artefact with this own hash can list `hash` as well.
+bool canListWith(const CodeHash& own, const CodeHash& hash);
+
 /// Joins an artefact's own hash with whatever else was found in it: no duplicates, and nothing that a ticket
 /// with this own hash could not list.
 std::vector<CodeHash> hashesForTicket(const CodeHash& own, const std::vector<CodeHash>& found);

@@ -18,9 +18,9 @@ using foundation::Dictionary;
 using foundation::format;
 using foundation::Value;
 
-SignedRecord signRecord(const Registry& registry, Record record) {
-    record.signedAt = registry.now();
-    Data ticket = registry.signer.makeTicket({record.hashes, record.revoked, record.signedAt});
+SignedRecord signRecord(const TicketSigner& signer, Record record, foundation::Date now) {
+    record.signedAt = now;
+    Data ticket = signer.makeTicket({record.hashes, record.revoked, record.signedAt});
     if (ticket.size() > kMaximumInlineTicketSize) record.asAsset = true;
     return {std::move(record), std::move(ticket)};
 }
@@ -29,7 +29,7 @@ std::vector<Record> putAll(const Registry& registry, const std::vector<Record>& 
     std::vector<SignedRecord> signedRecords;
     std::vector<Record> put;
     for (const Record& record : records) {
-        signedRecords.push_back(signRecord(registry, record));
+        signedRecords.push_back(signRecord(registry.signer, record, registry.now()));
         put.push_back(signedRecords.back().record);
     }
     occasion.time = registry.now();
@@ -110,6 +110,33 @@ std::vector<Record> revoke(const Registry& registry, const RevokeRequest& reques
     occasion.reason = request.reason;
     occasion.comment = request.comment;
     return putAll(registry, records, std::move(occasion));
+}
+
+namespace {
+
+Change putOne(RecordStore& store, const TicketSigner& signer, Environment environment, Record record,
+              const Occasion& occasion) {
+    SignedRecord entry = signRecord(signer, std::move(record), occasion.time);
+    PutOutcome outcome = store.put(environment, {entry}, occasion);
+    if (outcome.earlier) return {std::move(outcome.event), *std::move(outcome.earlier)};
+    return {std::move(outcome.event), std::move(entry.ticket)};
+}
+
+}  // namespace
+
+Change issueDescribed(RecordStore& store, const TicketSigner& signer, Environment environment,
+                      const DescribedArtefact& artefact, const Occasion& occasion) {
+    Record record = recordOfName(recordName(artefact.own), artefact.label);
+    record.hashes = hashesForTicket(artefact.own, artefact.others);
+    return putOne(store, signer, environment, std::move(record), occasion);
+}
+
+std::optional<Change> revokeNamed(RecordStore& store, const TicketSigner& signer, Environment environment,
+                                  const std::string& recordName, const Occasion& occasion) {
+    std::optional<Record> record = store.find(environment, recordName);
+    if (!record) return std::nullopt;
+    record->revoked = true;
+    return putOne(store, signer, environment, *std::move(record), occasion);
 }
 
 std::string describeRecords(const std::vector<Record>& records) {

@@ -52,6 +52,28 @@ std::vector<Record> issue(const Registry& registry, const IssueRequest& request)
 /// is an error (EX_DATAERR). Returns the records in the order of the request. Throws Failure.
 std::vector<Record> revoke(const Registry& registry, const RevokeRequest& request);
 
+/// An artefact that is not here, as somebody describes it who has it.
+struct DescribedArtefact {
+    std::string label;  // empty: the record's name
+    CodeHash own;
+    std::vector<CodeHash> others;  // that the ticket is to list as well; hashesForTicket() joins them
+};
+
+/// What became of one change.
+struct Change {
+    Event event;
+    foundation::Data ticket;
+};
+
+/// Issues a ticket for one artefact by its description. The occasion's request makes a repetition known: the
+/// result is that of the first time then. Throws Failure as issue() and RecordStore::put() do.
+Change issueDescribed(RecordStore& store, const TicketSigner& signer, Environment environment,
+                      const DescribedArtefact& artefact, const Occasion& occasion);
+
+/// Revokes the record of that name; `nullopt` if there is none. Throws Failure as issueDescribed() does.
+std::optional<Change> revokeNamed(RecordStore& store, const TicketSigner& signer, Environment environment,
+                                  const std::string& recordName, const Occasion& occasion);
+
 /// For people: one line a record, tab-separated: status, name, delivery, signature time, number of hashes,
 /// label.
 std::string describeRecords(const std::vector<Record>& records);

@@ -264,6 +264,7 @@ void Connection::log(const Answer& answer, std::size_t size, const std::string& 
     RequestEntry entry;
     entry.time = foundation::Date::now();
     entry.peer = peer_;
+    if (client_) entry.client = client_->name;
     if (headSeen_) {
         const HttpRequest& request = parser_->get();
         entry.method = {request.method_string().data(), request.method_string().size()};

@@ -14,6 +14,9 @@ inline constexpr std::uint16_t kDefaultPort = 8443;
 /// The port of metrics unless another is asked for.
 inline constexpr std::uint16_t kDefaultMetricsPort = 9464;
 
+/// The port of the administration listener, unless another one is given.
+inline constexpr std::uint16_t kDefaultAdminPort = 8444;
+
 /// The port that an https address without a port means.
 inline constexpr std::uint16_t kHttpsPort = 443;
 

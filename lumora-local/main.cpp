@@ -62,6 +62,8 @@ struct Arguments {
     bool verifies = false;
     std::string to;
     std::string listen;
+    std::string adminListen;
+    std::string clientAuthorities;
     std::string readyFile;
     std::string metricsListen;
     bool updatePlatform = false;
@@ -230,6 +232,16 @@ void runServe(const Arguments& arguments) {
             throw Failure(EX_USAGE, foundation::format("%@ is not ADDRESS:PORT", arguments.listen));
         }
     }
+    if (arguments.adminListen.empty() != arguments.clientAuthorities.empty()) {
+        throw Failure(EX_USAGE, "--admin-listen and --client-ca go together");
+    }
+    if (!arguments.adminListen.empty()) {
+        const auto endpoint = parseEndpoint(arguments.adminListen, kDefaultAdminPort);
+        if (!endpoint) {
+            throw Failure(EX_USAGE, foundation::format("%@ is not ADDRESS:PORT", arguments.adminListen));
+        }
+        options.admin = AdminOptions{*endpoint, arguments.clientAuthorities};
+    }
     if (!arguments.readyFile.empty()) options.readyFile = arguments.readyFile;
     options.updatePlatform = arguments.updatePlatform;
     options.version = companion::versionNumber();
@@ -356,6 +368,10 @@ void declareCommands(CLI::App& app, Arguments& arguments) {
                       "ADDRESS:PORT instead of what platform.json says; port 0: any free one");
     serve->add_option("--metrics-listen", arguments.metricsListen,
                       "ADDRESS:PORT for metrics over plain HTTP, for Prometheus (default: none)");
+    serve->add_option("--admin-listen", arguments.adminListen,
+                      "ADDRESS:PORT where clients with certificates issue and revoke; needs --client-ca");
+    serve->add_option("--client-ca", arguments.clientAuthorities,
+                      "PEM file: the authorities that those clients have their certificates from");
     serve->add_option("--ready-file", arguments.readyFile, "Gets the service's URL once it listens");
     serve->add_flag("--update-platform", arguments.updatePlatform,
                     "Let platform.json name this very service");

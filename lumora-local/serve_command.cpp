@@ -12,6 +12,7 @@
 #include <mutex>
 
 #include "foundation/format.h"
+#include "lumora-local/admin_listener.h"
 #include "lumora-local/certificate_dates.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
@@ -29,6 +30,8 @@ namespace {
 
 using foundation::format;
 
+constexpr std::size_t kAdminConnections = 512;
+
 /// Where a client finds a service that listens at `bound`: an address that stands for all is none to connect
 /// to.
 Endpoint reachable(const ServiceDirectory& directory, const Endpoint& bound) {
@@ -38,12 +41,12 @@ Endpoint reachable(const ServiceDirectory& directory, const Endpoint& bound) {
 /// Lines about the service in the form that service.json asks for. As JSON all of them go where requests go:
 /// standard error has the program's name before each line.
 ServeOutput inForm(LogForm form, const ServeOutput& output) {
-    if (form == LogForm::text) return output;
+    if (form == LogForm::text) return {output.out, output.err, output.out};
     const auto as = [out = output.out](const char* level) {
         return
             [out, level](std::string_view line) { out(messageAsJson(foundation::Date::now(), level, line)); };
     };
-    return {as("info"), as("error")};
+    return {as("info"), as("error"), output.out};
 }
 
 /// Whoever issues or revokes needs room for it.
@@ -99,6 +102,22 @@ void announce(const ServiceDirectory& directory, const ServeOptions& options, co
                    directory.platformPath(), toString(advertised)));
     }
     if (options.readyFile) replaceFile(*options.readyFile, foundation::asBytes(url + "\n"), 0644);
+}
+
+std::optional<AdminOptions> adminOf(const ServiceDirectory& directory) {
+    const std::optional<AdminSettings>& settings = directory.settings().admin;
+    if (!settings) return std::nullopt;
+    return AdminOptions{settings->listen, settings->clientAuthorities};
+}
+
+void announce(const ServiceDirectory& directory, const AdminListener& admin, const ServeOutput& output) {
+    const Endpoint endpoint = reachable(directory, admin.endpoint());
+    const auto& hosts = directory.hosts();
+    if (std::find(hosts.begin(), hosts.end(), endpoint.host) == hosts.end()) {
+        output.err(format("the service's certificate does not speak for %@: clients will refuse it there",
+                          endpoint.host));
+    }
+    output.out(format("administration at https://%@", toString(endpoint)));
 }
 
 foundation::FileDescriptor waitForSignals(std::initializer_list<int> numbers) {
@@ -166,9 +185,11 @@ class MetricsSource {
 };
 
 /// From the files that service.json names now, which may be others than before.
-void reload(const std::string& path, TlsContext& tls, MetricsSource& metrics, const ServeOutput& output) {
+void reload(const std::string& path, TlsContext& tls, MetricsSource& metrics, AdminListener* admin,
+            const ServeOutput& output) {
     try {
         const ServiceDirectory directory = ServiceDirectory::open(path);
+        if (admin != nullptr) admin->reload(directory);
         tls.reload(tlsFilesOf(directory));
         metrics.readCertificatesAgain(directory);
         output.out("read the certificate and the key again");
@@ -192,7 +213,7 @@ std::size_t connectionsThatFit() {
 
 /// Before a byte of a client is read. Certificate and key may be links that whoever renews them points
 /// elsewhere.
-void giveUpRights(const ServiceDirectory& directory, const ServeOutput& output) {
+void giveUpRights(const ServiceDirectory& directory, const AdminListener* admin, const ServeOutput& output) {
     sandbox::Confinement rights;
     rights.files = sandbox::libraryFiles();
     rights.files.push_back({directory.path(), sandbox::Access::write});
@@ -202,6 +223,7 @@ void giveUpRights(const ServiceDirectory& directory, const ServeOutput& output) 
     addStoreRights(rights, directory);
     if (!tls.passphraseFile.empty())
         sandbox::append(rights.files, sandbox::fileAndItsLinks(pathOfPassphrase(tls.passphraseFile)));
+    if (admin != nullptr) admin->addRights(rights, directory);
     for (const std::string& missing : sandbox::confine(rights)) output.err(missing);
 }
 
@@ -217,6 +239,10 @@ void serve(const ServiceDirectory& directory, const ServeOptions& options, const
     // A file that an earlier run left would tell of a service that is not there yet.
     if (options.readyFile) ::unlink(options.readyFile->c_str());
     if (options.metricsListen) requireMetrics();
+    // First, for a key in a token needs a process that has no second thread and no connection yet.
+    const std::optional<AdminOptions> adminOptions = options.admin ? options.admin : adminOf(directory);
+    std::optional<AdminListener> admin;
+    if (adminOptions) admin.emplace(directory, *adminOptions, output);
     TlsContext tls(tlsFilesOf(directory));
     const std::unique_ptr<RecordStore> store = openStore(directory);
     Listener listener(options.listen ? *options.listen : directory.advertisedEndpoint());
@@ -226,6 +252,7 @@ void serve(const ServiceDirectory& directory, const ServeOptions& options, const
         metricsListener.emplace(*options.metricsListen);
         output.out(format("metrics at http://%@/metrics", toString(metricsListener->endpoint())));
     }
+    if (admin) announce(directory, *admin, output);
     announce(directory, options, output, endpoint);
 
     const ServiceManager manager;
@@ -233,19 +260,25 @@ void serve(const ServiceDirectory& directory, const ServeOptions& options, const
     const LookupService lookups(*store, directory.hosts(), endpoint, fullDiskAt(directory.servicePath("")));
     ServerLimits limits;
     limits.connections = connectionsThatFit();
+    const std::size_t adminConnections = std::min(kAdminConnections, limits.connections / 8);
+    if (admin) limits.connections -= adminConnections;
     MetricsSource metrics(directory, options.version, *store);
-    giveUpRights(directory, output);
+    giveUpRights(directory, admin ? &*admin : nullptr, output);
     std::optional<MetricsListener> scrapes;
     if (metricsListener) scrapes.emplace(*metricsListener, [&metrics] { return metrics.text(); });
-    Server server(lookups, tls, lines.out, output.err, limits, directory.settings().log, &metrics.counts());
+    Server server(lookups, tls, output.requests, output.err, limits, directory.settings().log,
+                  &metrics.counts());
     const int hangUp = signals.reload.get();
-    std::vector<Watch> watches{{hangUp, [&directory, &tls, &metrics, &output, hangUp] {
+    AdminListener* const adminListener = admin ? &*admin : nullptr;
+    std::vector<Watch> watches{{hangUp, [&directory, &tls, &metrics, adminListener, &output, hangUp] {
                                     takeSignals(hangUp);
-                                    reload(directory.path(), tls, metrics, output);
+                                    reload(directory.path(), tls, metrics, adminListener, output);
                                 }}};
     if (const auto watch = run.watch()) watches.push_back(*watch);
+    if (admin) admin->start(signals.stop.get(), adminConnections);
     run.ready(endpoint);
     server.run(listener, signals.stop.get(), watches);
+    admin.reset();
     manager.tell("STOPPING=1");
     output.out("stopped");
 }

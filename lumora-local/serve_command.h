@@ -12,9 +12,16 @@
 
 namespace pinwell::lumora {
 
+/// Where clients with certificates are served, and whose certificates they have.
+struct AdminOptions {
+    Endpoint listen;
+    std::string clientAuthorities;  // a PEM file
+};
+
 struct ServeOptions {
     std::string version;                    // of the program, for its metrics
     std::optional<Endpoint> metricsListen;  // no metrics, when absent
+    std::optional<AdminOptions> admin;      // what service.json says, when absent
     std::optional<Endpoint> listen;         // where platform.json sends clients, when absent
     std::optional<std::string>
         readyFile;                // gets one line, "https://ADDRESS:PORT", once connections are accepted
@@ -23,8 +30,9 @@ struct ServeOptions {
 
 /// Takes whole lines, without a newline; from any thread, several at a time.
 struct ServeOutput {
-    std::function<void(std::string_view)> out;  // readiness and the access log
-    std::function<void(std::string_view)> err;  // what went wrong, or will
+    std::function<void(std::string_view)> out;         // readiness and the access log
+    std::function<void(std::string_view)> err;         // what went wrong, or will
+    std::function<void(std::string_view)> requests{};  // the access log, in its form already
 };
 
 /// Descriptors that become readable when signals arrive.
@@ -37,8 +45,8 @@ struct ServeSignals {
 /// other thread exists. Throws Failure.
 ServeSignals catchServeSignals();
 
-/// Serves until it is asked to stop; SIGHUP makes it read the certificate and the key again. Throws Failure
-/// when it cannot begin.
+/// Serves until it is asked to stop; SIGHUP makes it read certificates, keys and access.toml again. Throws
+/// Failure when it cannot begin.
 void serve(const ServiceDirectory& directory, const ServeOptions& options, const ServeOutput& output,
            const ServeSignals& signals);
 

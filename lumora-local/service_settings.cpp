@@ -138,6 +138,16 @@ ServerSettings readServer(const SettingsObject& settings, const Folder& folder) 
     return {folder.pathOf(server.key), folder.pathOf(server.certificate)};
 }
 
+std::optional<AdminSettings> readAdmin(const SettingsObject& settings, const Folder& folder) {
+    if (!settings.has("admin")) return std::nullopt;
+    const SettingsObject object = settings.object("admin");
+    object.allowOnly({"listen", "clients"});
+    const std::optional<Endpoint> listen = parseEndpoint(object.text("listen"), kDefaultAdminPort);
+    if (!listen) object.complain("admin.listen", "is not ADDRESS:PORT");
+    if (object.text("clients").empty()) object.complain("admin.clients", "is missing");
+    return AdminSettings{*listen, folder.pathOf(object.text("clients"))};
+}
+
 Role readRole(const SettingsObject& settings, const Value& role, const std::string& path) {
     if (!settings.has("role")) return Role::full;
     if (role.string() == nullptr || *role.string() != "lookup") {
@@ -162,7 +172,7 @@ bool isTokenKey(std::string_view key) {
 
 ServiceSettings parseServiceSettings(const Value& document, const std::string& path) {
     const SettingsObject settings(document, path, "");
-    settings.allowOnly({"hosts", "log", "passphraseFile", "role", "server", "signer", "store"});
+    settings.allowOnly({"admin", "hosts", "log", "passphraseFile", "role", "server", "signer", "store"});
     const Folder folder(path);
     ServiceSettings result;
     result.hosts = readHosts(settings, path);
@@ -179,6 +189,7 @@ ServiceSettings parseServiceSettings(const Value& document, const std::string& p
     result.role = readRole(settings, document["role"], path);
     result.signer = readSigner(settings, folder);
     result.server = readServer(settings, folder);
+    result.admin = readAdmin(settings, folder);
     return result;
 }
 

@@ -9,6 +9,8 @@
 //   "signer"          whose signature tickets bear: {"key": K, "chain": [SIGNER, INTERMEDIATE, ROOT]}. K is a
 //                     file or a URI "pkcs11:..."; the others are certificates. "requested" is a key that
 //                     waits for its certificate.
+//   "admin"           {"listen": "ADDRESS:PORT", "clients": FILE}: where clients with certificates issue and
+//                     revoke, and the certificates of the authorities that they have theirs from
 //   "server"          {"key": FILE, "certificate": FILE}, what TLS clients see
 //
 // Files are relative to the folder of service.json. Without "signer" and "server" they have the names that
@@ -21,6 +23,7 @@
 
 #include "foundation/value.h"
 #include "lumora-local/access_log.h"
+#include "lumora-local/endpoint.h"
 
 namespace pinwell::lumora {
 
@@ -50,6 +53,11 @@ struct ServerSettings {
     std::string certificate;  // a path; the file may hold further certificates of the chain
 };
 
+struct AdminSettings {
+    Endpoint listen;
+    std::string clientAuthorities;  // a path
+};
+
 struct ServiceSettings {
     std::vector<std::string> hosts;       // canonical; never empty
     std::string passphraseFile;           // a path or "credential:NAME"; empty if there is none
@@ -58,6 +66,7 @@ struct ServiceSettings {
     LogForm log = LogForm::text;
     SignerSettings signer;
     ServerSettings server;
+    std::optional<AdminSettings> admin;
 };
 
 /// Reads the document of the file at `path`; the paths in the result are absolute, or relative as `path` is.

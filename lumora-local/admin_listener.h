@@ -1,0 +1,64 @@
+// The second listener of a service: for clients that have a certificate (admin_service.h).
+//
+// It has a server, threads, a connection to the store and bounds of its own, so that what its clients do is
+// in no lookup's way.
+#pragma once
+
+#include <memory>
+#include <mutex>
+#include <string>
+#include <thread>
+
+#include "lumora-local/admin_routes.h"
+#include "lumora-local/listener.h"
+#include "lumora-local/serve_command.h"
+#include "lumora-local/server.h"
+#include "sandbox/sandbox.h"
+
+namespace pinwell::lumora {
+
+class AdminListener {
+  public:
+    /// Opens all that it needs: the signing key (which may start a process, so the caller has one thread),
+    /// the store, access.toml, the authorities, the socket. Throws Failure.
+    AdminListener(const ServiceDirectory& directory, AdminOptions options, const ServeOutput& output);
+
+    /// Waits for its threads. They end after `stopDescriptor` has become readable.
+    ~AdminListener();
+    AdminListener(const AdminListener&) = delete;
+    AdminListener& operator=(const AdminListener&) = delete;
+
+    const Endpoint& endpoint() const noexcept { return listener_.endpoint(); }
+
+    /// Adds what it reads while it runs.
+    void addRights(sandbox::Confinement& rights, const ServiceDirectory& directory) const;
+
+    /// Serves, with threads of its own, at most `connections` at once.
+    void start(int stopDescriptor, std::size_t connections);
+
+    /// Reads access.toml, certificates and a key in a file again. What cannot be used stays as it was, and
+    /// the error log says so.
+    void reload(const ServiceDirectory& directory);
+
+  private:
+    std::shared_ptr<const TicketSigner> signer() const;
+    void reloadSigner(const ServiceDirectory& directory);
+
+    const AdminOptions options_;
+    const ServeOutput output_;
+    const LogForm form_;
+    mutable std::mutex mutex_;
+    std::shared_ptr<const TicketSigner> signer_;
+    SignerSettings signerSettings_;
+    std::unique_ptr<RecordStore> store_;
+    AccessList access_;
+    TlsContext tls_;
+    Listener listener_;
+    TokenBuckets rates_;
+    RefusalLog refusals_;
+    AdminService service_;
+    std::unique_ptr<Server> server_;
+    std::thread thread_;
+};
+
+}  // namespace pinwell::lumora

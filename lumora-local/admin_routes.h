@@ -1,0 +1,34 @@
+// The requests of docs/service/openapi.json.
+#pragma once
+
+#include <functional>
+#include <memory>
+
+#include "lumora-local/admin_service.h"
+#include "lumora-local/record_store.h"
+#include "lumora-local/ticket_maker.h"
+
+namespace pinwell::lumora {
+
+/// How many records or events are on a page.
+inline constexpr std::size_t kDefaultPage = 50;
+inline constexpr std::size_t kMaximumPage = 100;
+
+/// Returns the signer that is in use now. From any thread.
+using SignerInUse = std::function<std::shared_ptr<const TicketSigner>()>;
+
+/// POST /v1/tickets, POST /v1/revocations. `store` must outlive the routes.
+AdminRoutes changingRoutes(RecordStore& store, SignerInUse signer);
+
+/// GET /v1/records, GET /v1/events. `store` must outlive the routes.
+AdminRoutes readingRoutes(RecordStore& store);
+
+/// What the query of GET /v1/records and of GET /v1/events asks for. Both throw Refused (400).
+RecordSearch recordSearchOf(const Query& query);
+EventSearch eventSearchOf(const Query& query);
+
+/// Where a page begins, as text that fits into a query.
+std::string toString(const RecordCursor& cursor);
+std::string toString(const EventCursor& cursor);
+
+}  // namespace pinwell::lumora

@@ -1,0 +1,153 @@
+#include "lumora-local/admin_service.h"
+
+#include <algorithm>
+
+#include "foundation/format.h"
+#include "lumora-local/change_request.h"
+#include "lumora-local/problem.h"
+
+namespace pinwell::lumora {
+namespace {
+
+using foundation::format;
+
+constexpr std::int64_t kRetryAfter = 1;
+
+bool fits(const AdminRoute& route, std::string_view path) {
+    if (!route.path.ends_with('*')) return route.path == path;
+    return path.starts_with(std::string_view(route.path).substr(0, route.path.size() - 1));
+}
+
+bool fits(const AdminRoute& route, std::string_view path, std::string_view method) {
+    return fits(route, path) && (route.method == method || (route.method == "GET" && method == "HEAD"));
+}
+
+/// An answer is for its client alone, and is what it says it is.
+Answer withCommonHeaders(Answer answer) {
+    answer.headers.emplace_back("Cache-Control", "no-store");
+    answer.headers.emplace_back("X-Content-Type-Options", "nosniff");
+    return answer;
+}
+
+std::string_view nameOf(bool Rights::*right) {
+    if (right == &Rights::issue) return "issue";
+    return right == &Rights::revoke ? "revoke" : "read";
+}
+
+/// Whether a refusal with this status is about what the client asked for, and not about the moment.
+bool isClientsFault(int status) {
+    return status >= 400 && status < 500 && status != 408 && status != 429;
+}
+
+}  // namespace
+
+const AdminRoute& AdminService::routeOf(const RequestHead& head) const {
+    const std::string_view path = pathOf(head.target);
+    for (const AdminRoute& route : routes_) {
+        if (fits(route, path, head.method)) return route;
+    }
+    const std::string methods = allowedAt(head);
+    if (methods.empty()) throw Refused(404, "there is nothing at this path");
+    throw Refused(405, format("the method here is %s", methods));
+}
+
+AdminRequest AdminService::admit(const RequestHead& head, const AdminRoute& route) const {
+    AdminRequest request{head, pathOf(head.target), {}, access_.of(head.client), std::nullopt, {}};
+    if (!(request.rights.*route.right)) {
+        throw Refused(403,
+                      format("access.toml does not give %@ the role %s", head.client, nameOf(route.right)));
+    }
+    std::optional<Query> query = parseQuery(head.target);
+    if (!query) throw Refused(400, "the query is malformed");
+    for (const auto& [name, value] : *query) {
+        if (std::find(route.parameters.begin(), route.parameters.end(), name) == route.parameters.end())
+            throw Refused(400, format("\"%@\" is no parameter of this request", name.substr(0, 64)));
+    }
+    request.query = *std::move(query);
+    if (route.method != "POST") return request;
+    if (!isJson(head.contentType)) throw Refused(415, "the content type of this request is application/json");
+    if (!head.contentEncoding.empty() && head.contentEncoding != "identity")
+        throw Refused(415, "the body is sent without a content encoding");
+    if (head.idempotencyKey) request.idempotencyKey = parseIdempotencyKey(*head.idempotencyKey);
+    return request;
+}
+
+std::optional<Answer> AdminService::answerHead(const RequestHead& head) const {
+    if (const auto seconds = rates_.take(head.client)) {
+        return withCommonHeaders(problemForNow(429, "too many requests of this client", *seconds));
+    }
+    try {
+        const AdminRoute& route = routeOf(head);
+        const AdminRequest request = admit(head, route);
+        if (route.method == "POST") return std::nullopt;
+        return withCommonHeaders(route.handle(request));
+    } catch (const Refused& refused) {
+        note(head, refused.status(), refused.what(), {});
+        Answer answer = problem(refused.status(), refused.what());
+        if (refused.status() == 405) answer.headers.emplace_back("Allow", allowedAt(head));
+        return withCommonHeaders(std::move(answer));
+    }
+}
+
+Answer AdminService::answerBody(const RequestHead& head, std::string_view body) const {
+    try {
+        const AdminRoute& route = routeOf(head);
+        AdminRequest request = admit(head, route);
+        request.body = body;
+        return withCommonHeaders(route.handle(request));
+    } catch (const Refused& refused) {
+        note(head, refused.status(), refused.what(), body);
+        return withCommonHeaders(problem(refused.status(), refused.what()));
+    }
+}
+
+Answer AdminService::refuse(int status, const RequestHead* head) const {
+    const std::string_view detail = [status]() -> std::string_view {
+        switch (status) {
+            case 408:
+                return "the request took too long to arrive";
+            case 411:
+                return "the request does not say how long its body is";
+            case 413:
+                return "the body has more than 1 MiB";
+            case 414:
+                return "the request's target is too long";
+            case 431:
+                return "the request's headers are too large";
+            default:
+                return "the request is malformed";
+        }
+    }();
+    if (head != nullptr) note(*head, status, detail, {});
+    return withCommonHeaders(problem(status, detail));
+}
+
+Answer AdminService::refuseForNow(std::string_view) const {
+    return withCommonHeaders(
+        problemForNow(503,
+                      "the request cannot be carried out at the moment; whether it changed something may be "
+                      "unknown. The same request with the same Idempotency-Key is safe",
+                      kRetryAfter));
+}
+
+void AdminService::note(const RequestHead& head, int status, std::string_view detail,
+                        std::string_view body) const {
+    const std::string_view path = pathOf(head.target);
+    const bool changes =
+        head.method == "POST" && std::any_of(routes_.begin(), routes_.end(), [&](const AdminRoute& route) {
+            return route.method == "POST" && fits(route, path);
+        });
+    if (!changes || !isClientsFault(status)) return;
+    refusals_.note(head.client, attemptIn(body),
+                   format("%d %s: POST %s: %@", status, titleOf(status), path, detail));
+}
+
+std::string AdminService::allowedAt(const RequestHead& head) const {
+    std::string methods;
+    for (const AdminRoute& route : routes_) {
+        if (fits(route, pathOf(head.target))) methods += (methods.empty() ? "" : ", ") + route.method;
+    }
+    return methods;
+}
+
+}  // namespace pinwell::lumora
