@@ -1,24 +1,16 @@
 // The hash that a ticket vouches for, and the name of the record that holds the ticket.
 #pragma once
 
-#include <compare>
 #include <cstdint>
 #include <optional>
 #include <string>
 #include <string_view>
 
-#include "foundation/bytes.h"
+#include "src/code_hashes.h"
 
 namespace pinwell::lumora {
 
-/// A code directory's hash with the number of its digest type. Number 0 stands for a hash whose digest type
-/// is not known; it has 20 bytes.
-struct CodeHash {
-    std::uint32_t algorithm = 0;
-    foundation::Data hash;
-
-    auto operator<=>(const CodeHash&) const = default;
-};
+using pinwell::CodeHash;
 
 /// The length of a hash of that digest type: 20 for 0 to 3, 48 for 4; nothing for any other.
 std::optional<std::size_t> hashLength(std::uint32_t algorithm);

@@ -29,7 +29,7 @@ class PinwellArtefactHasher final : public ArtefactHasher {
         Artefact artefact;
         artefact.label = url.lastPathComponent();
         artefact.own = ownHash(url, path);
-        artefact.hashes = hashesForTicket(artefact.own, allHashes(url));
+        artefact.hashes = listableHashes(artefact.own, url, host_.services().codeSigning);
         return artefact;
     }
 
@@ -45,19 +45,6 @@ class PinwellArtefactHasher final : public ArtefactHasher {
         if (!hash || hash->empty())
             throw Failure(EX_DATAERR, format("%@ has no valid signature to vouch for", path));
         return {file->digestAlgorithm(), *std::move(hash)};
-    }
-
-    /// An unsigned disk image or a package has none beside its own.
-    std::vector<CodeHash> allHashes(const URL& url) {
-        std::vector<codesign::SigningInformation> all;
-        if (host_.services().codeSigning.copyAllCodeHashes(url, all) != codesign::kSuccess) return {};
-        std::vector<CodeHash> hashes;
-        for (const codesign::SigningInformation& code : all) {
-            for (std::size_t i = 0; i < code.cdHashes.size() && i < code.digestAlgorithms.size(); ++i) {
-                hashes.push_back({code.digestAlgorithms[i], code.cdHashes[i]});
-            }
-        }
-        return hashes;
     }
 
     // Hashing ends no process.

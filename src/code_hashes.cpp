@@ -1,0 +1,34 @@
+#include "src/code_hashes.h"
+
+#include <set>
+
+#include "src/tm_ticket.h"
+
+namespace pinwell {
+
+std::vector<CodeHash> listableHashes(const CodeHash& own, const std::vector<CodeHash>& found) {
+    std::vector<CodeHash> hashes{own};
+    std::set<CodeHash> listed{own};
+    for (const CodeHash& hash : found) {
+        // Digest types that tickets do not know (a later platform's) leave the artefact's other hashes
+        // usable. A ticket over a hash of unknown digest type lists such hashes alone.
+        const std::size_t length = tm_cdhash_algorithm_get_size(hash.algorithm);
+        const bool listable =
+            length != 0 && hash.hash.size() == length && (hash.algorithm == 0) == (own.algorithm == 0);
+        if (listable && listed.insert(hash).second) hashes.push_back(hash);
+    }
+    return hashes;
+}
+
+std::vector<CodeHash> listableHashes(const CodeHash& own, const foundation::URL& artefact,
+                                     codesign::CodeSigningService& codeSigning) {
+    std::vector<codesign::SigningInformation> all;
+    if (codeSigning.copyAllCodeHashes(artefact, all) != codesign::kSuccess) return {own};
+    std::vector<CodeHash> found;
+    for (const codesign::SigningInformation& code : all)
+        for (std::size_t i = 0; i < code.cdHashes.size() && i < code.digestAlgorithms.size(); ++i)
+            found.push_back({code.digestAlgorithms[i], code.cdHashes[i]});
+    return listableHashes(own, found);
+}
+
+}  // namespace pinwell
