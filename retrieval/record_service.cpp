@@ -1,14 +1,10 @@
 #include "retrieval/record_service.h"
 
 #include <algorithm>
-#include <array>
 #include <atomic>
-#include <charconv>
-#include <condition_variable>
-#include <ctime>
 #include <functional>
 #include <mutex>
-#include <set>
+#include <optional>
 #include <stdexcept>
 #include <thread>
 #include <utility>
@@ -19,6 +15,7 @@
 #include "foundation/url.h"
 #include "foundation/value.h"
 #include "retrieval/connection.h"
+#include "retrieval/exchange_failure.h"
 #include "src/ticket_record.h"
 
 namespace pinwell::retrieval {
@@ -27,48 +24,18 @@ using foundation::Array;
 using foundation::Dictionary;
 using foundation::Value;
 
-struct Cancellation::State {
-    std::mutex mutex;
-    std::condition_variable changed;
-    bool cancelled = false;
-    std::set<Connection*> connections;  // in use by calls
-};
-
-Cancellation::Cancellation() : state_(std::make_shared<State>()) {}
-Cancellation::~Cancellation() = default;
-
-void Cancellation::cancel() {
-    const std::lock_guard lock(state_->mutex);
-    state_->cancelled = true;
-    state_->changed.notify_all();
-    for (Connection* const connection : state_->connections) connection->cancel();
-}
-
-bool Cancellation::isCancelled() const {
-    const std::lock_guard lock(state_->mutex);
-    return state_->cancelled;
-}
-
-bool Cancellation::sleepUntil(Clock::time_point end) const {
-    std::unique_lock lock(state_->mutex);
-    return state_->changed.wait_until(lock, end, [this] { return state_->cancelled; });
-}
+namespace {
 
 /// A connection for one thread of a call. It goes back to the others unless it was cancelled.
 class ConnectionLease {
   public:
     ConnectionLease(const Cancellation& cancellation, std::unique_ptr<Connection> connection,
                     std::function<void(std::unique_ptr<Connection>)> giveBack)
-        : state_(cancellation.state_), connection_(std::move(connection)), giveBack_(std::move(giveBack)) {
-        const std::lock_guard lock(state_->mutex);
-        state_->connections.insert(connection_.get());
-        if (state_->cancelled) connection_->cancel();
+        : connection_(std::move(connection)), giveBack_(std::move(giveBack)) {
+        use_.emplace(cancellation, *connection_);
     }
     ~ConnectionLease() {
-        {
-            const std::lock_guard lock(state_->mutex);
-            state_->connections.erase(connection_.get());
-        }
+        use_.reset();
         if (!connection_->isCancelled()) giveBack_(std::move(connection_));
     }
     ConnectionLease(const ConnectionLease&) = delete;
@@ -77,65 +44,13 @@ class ConnectionLease {
     Connection& operator*() const noexcept { return *connection_; }
 
   private:
-    const std::shared_ptr<Cancellation::State> state_;
     std::unique_ptr<Connection> connection_;
     const std::function<void(std::unique_ptr<Connection>)> giveBack_;
+    std::optional<Cancellation::Use> use_;
 };
-
-namespace {
 
 // With several names left, a service that has failed so often in a row is not asked for the rest of them.
 constexpr unsigned kFailuresInARow = 6;
-
-// Answers of a gateway, or of a service that has too much to do: they say nothing of the record.
-constexpr std::array kBusyStatuses{429, 502, 503, 504};
-
-bool isBusy(int status) {
-    return std::find(kBusyStatuses.begin(), kBusyStatuses.end(), status) != kBusyStatuses.end();
-}
-
-// RFC 9110, section 10.2.3: seconds, or a date.
-std::optional<std::chrono::seconds> retryAfterOf(const https::HTTPResponse& response) {
-    const auto text = response.header("Retry-After");
-    if (!text) return std::nullopt;
-    std::uint32_t seconds = 0;
-    const auto [end, error] = std::from_chars(text->data(), text->data() + text->size(), seconds);
-    if (error == std::errc{} && end == text->data() + text->size()) return std::chrono::seconds(seconds);
-    if (error == std::errc::result_out_of_range) return std::chrono::seconds::max();
-
-    std::tm date{};
-    const char* const rest = strptime(text->c_str(), "%a, %d %b %Y %H:%M:%S GMT", &date);
-    if (rest == nullptr || *rest != '\0') return std::nullopt;
-    return std::chrono::seconds(std::max<std::time_t>(timegm(&date) - std::time(nullptr), 0));
-}
-
-foundation::Error busyError(const https::HTTPResponse& response) {
-    return {foundation::kURLErrorDomain, static_cast<std::int64_t>(https::URLErrorCode::badServerResponse),
-            "The host \"" + response.url.host() + "\" answered with status " +
-                std::to_string(response.status) + " (" +
-                https::localizedStringForStatusCode(response.status) + ")."};
-}
-
-// An exchange that brought no answer, as the answer to a name.
-std::optional<Answer> failureOf(const Exchange& exchange) {
-    Answer answer;
-    answer.messages = exchange.messages;
-    if (exchange.error) {
-        answer.kind = exchange.serverWasRefused ? Answer::Kind::untrusted : Answer::Kind::unreachable;
-        answer.error = exchange.error;
-        return answer;
-    }
-    if (exchange.response && isBusy(exchange.response->status)) {
-        answer.retryAfter = retryAfterOf(*exchange.response);
-        answer.error = busyError(*exchange.response);
-        return answer;
-    }
-    if (exchange.body.empty()) {
-        answer.response = exchange.response;
-        return answer;
-    }
-    return std::nullopt;
-}
 
 // The request's identifier names the file that a ticket is kept in: a number makes each one different.
 https::HTTPResponse withOwnIdentifier(https::HTTPResponse response) {

@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "retrieval/answer.h"
+#include "retrieval/cancellation.h"
 #include "retrieval/retry_policy.h"
 #include "src/platform.h"
 
@@ -22,28 +23,6 @@ inline constexpr std::size_t kNamesPerRequest = 200;
 
 /// The most connections of one call.
 inline constexpr std::size_t kConnectionsPerCall = 4;
-
-/// Ends calls before their time. May be shared by several calls, and used from any thread.
-class Cancellation {
-  public:
-    Cancellation();
-    ~Cancellation();
-    Cancellation(const Cancellation&) = delete;
-    Cancellation& operator=(const Cancellation&) = delete;
-
-    /// Calls that run end soon, with errors; later ones end at once.
-    void cancel();
-    bool isCancelled() const;
-
-    /// Sleeps until then. Returns true, and maybe earlier, if it is cancelled.
-    bool sleepUntil(Clock::time_point end) const;
-
-  private:
-    friend class RecordService;
-    friend class ConnectionLease;
-    struct State;
-    std::shared_ptr<State> state_;
-};
 
 class RecordService {
   public:

@@ -43,6 +43,8 @@ std::string asJson(const Report& report) {
                  {"attempts", report.attempts},         {"seconds", report.seconds},
                  {"messages", report.messages}};
     if (report.file) json["file"] = *report.file;
+    if (report.action) json["action"] = *report.action;
+    if (report.event) json["event"] = *report.event;
     return json.dump(-1, ' ', false, Json::error_handler_t::replace);
 }
 

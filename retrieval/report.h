@@ -23,7 +23,11 @@ struct Report {
     std::vector<std::string> messages;
 
     /// A file that was written, or would have been; in JSON only if it is set.
-    std::optional<std::string> file;
+    std::optional<std::string> file{};
+
+    /// What the service did for a request, and the hash of its log's entry; in JSON only if they are set.
+    std::optional<std::string> action{};
+    std::optional<std::string> event{};
 };
 
 /// One line of JSON, without its newline, as docs/batch.schema.json and docs/ticket.schema.json have it.

@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <functional>
 #include <optional>
+#include <vector>
 
 #include "foundation/bytes.h"
 #include "trust/trust.h"
@@ -21,5 +22,9 @@ enum class TicketVerdict : std::uint8_t {
 TicketVerdict judgeTicket(const std::optional<foundation::Data>& ticket,
                           const std::function<std::optional<foundation::Data>()>& hash,
                           trust::TrustService& trust);
+
+/// The same of a ticket that is to list each of these hashes. Without hashes it is refused.
+TicketVerdict judgeTicket(const std::optional<foundation::Data>& ticket,
+                          const std::vector<foundation::Data>& hashes, trust::TrustService& trust);
 
 }  // namespace pinwell

@@ -208,9 +208,11 @@ class NetworkSession : public Session {
             if (!answer) return answer.error();
             if (!answer->redirectTarget) return std::move(answer->response);
             if (redirects == options_.maximumRedirects)
-                return makeError(URLErrorCode::tooManyRedirects,
-                                 "\"" + request.url->host() + "\" redirects once more after " +
-                                     std::to_string(redirects) + " redirects.");
+                return makeError(
+                    URLErrorCode::tooManyRedirects,
+                    "\"" + request.url->host() + "\" redirects " +
+                        (redirects == 0 ? "a request that must not be redirected."
+                                        : "once more after " + std::to_string(redirects) + " redirects."));
             Result<Request> next =
                 requestAfterRedirect(request, answer->response.status, *answer->redirectTarget);
             if (!next) return next.error();

@@ -1,0 +1,272 @@
+#include "retrieval/ticket_request.h"
+
+#include <algorithm>
+#include <array>
+#include <random>
+#include <utility>
+
+#include "codesign/digest.h"
+#include "foundation/base64.h"
+#include "foundation/format.h"
+#include "foundation/json.h"
+#include "foundation/value.h"
+#include "retrieval/exchange_failure.h"
+#include "src/PWHashedFile/PWHashedFile.h"
+#include "src/messages.h"
+#include "src/record_name.h"
+#include "src/ticket_verdict.h"
+
+namespace pinwell::retrieval {
+namespace {
+
+using foundation::Array;
+using foundation::Dictionary;
+using foundation::Value;
+using https::URLErrorCode;
+
+constexpr std::string_view kPath = "/v1/tickets";
+constexpr std::array<std::string_view, 3> kActions{"issued", "reissued", "reinstated"};
+constexpr std::size_t kEventDigits = 64;
+constexpr std::size_t kShownDetail = 500;  // bytes of what a service says of its own
+
+constexpr int kStatusRequestTimeout = 408;
+constexpr int kStatusConflict = 409;
+
+// Another try may find the way, or the service at its place.
+constexpr std::array kLosses{URLErrorCode::cannotFindHost, URLErrorCode::cannotConnect,
+                             URLErrorCode::timedOut, URLErrorCode::connectionLost, URLErrorCode::proxyFailed};
+
+bool isCode(const foundation::Error& error, URLErrorCode code) {
+    return error.domain() == foundation::kURLErrorDomain && error.code() == static_cast<std::int64_t>(code);
+}
+
+bool isLoss(const foundation::Error& error) {
+    return std::any_of(kLosses.begin(), kLosses.end(),
+                       [&error](URLErrorCode code) { return isCode(error, code); });
+}
+
+void end(FetchedTicket& result, Cause cause, int status, std::string message) {
+    result.cause = cause;
+    result.exitStatus = status;
+    result.messages.push_back(std::move(message));
+}
+
+std::string nameOf(const CodeHash& hash) {
+    return recordNameForHash(hash.algorithm, hash.hash);
+}
+
+foundation::Result<foundation::Data> bodyOf(const TicketWish& wish) {
+    Array hashes;
+    for (const CodeHash& hash : wish.hashes) hashes.push_back(nameOf(hash));
+    Dictionary body{
+        {"record", nameOf(wish.hashes.front())}, {"hashes", std::move(hashes)}, {"label", wish.label}};
+    if (wish.reinstates) body.emplace("reinstate", true);
+    if (!wish.comment.empty()) body.emplace("comment", wish.comment);
+    return foundation::serializeJSON(Value(std::move(body)));
+}
+
+// Says nothing of the request. One that came of its contents alone would bring yesterday's ticket when a
+// record has been revoked since.
+std::string newKey() {
+    std::random_device source;
+    foundation::Data bytes;
+    for (int i = 0; i < 4; ++i) {
+        const std::uint32_t word = source();
+        for (unsigned shift = 0; shift < 32; shift += 8) bytes.push_back(std::byte(word >> shift & 0xFFU));
+    }
+    return foundation::toHex(bytes);
+}
+
+https::Request requestFor(const foundation::URL& url, foundation::Data body) {
+    https::Request request;
+    request.url = url;
+    request.method = "POST";
+    request.body = std::move(body);
+    request.addHeader("Content-Type", "application/json");
+    request.addHeader("Accept", "application/json, application/problem+json");
+    request.addHeader("Idempotency-Key", "\"" + newKey() + "\"");
+    return request;
+}
+
+// "application/json; charset=utf-8" is application/json.
+bool hasType(const https::HTTPResponse& response, std::string_view type) {
+    std::string field = response.header("Content-Type").value_or("");
+    field.resize(std::min(field.find_first_of("; \t"), field.size()));
+    const https::CaseInsensitiveLess less;
+    return !less(field, type) && !less(type, field);
+}
+
+const std::string* textIn(const Value& document, std::string_view key) {
+    return document.dictionary() != nullptr ? document[key].string() : nullptr;
+}
+
+// A part of a text that ends between two characters.
+std::string cutTo(std::size_t length, const std::string& text) {
+    if (text.size() <= length) return text;
+    while (length > 0 && (static_cast<unsigned char>(text[length]) & 0xC0U) == 0x80U) --length;
+    return text.substr(0, length) + "...";
+}
+
+// What the service says is wrong, with its status; a body that is no problem says nothing.
+std::string problemIn(const Exchange& exchange) {
+    std::string text = foundation::format("%d (%@)", exchange.response->status,
+                                          https::localizedStringForStatusCode(exchange.response->status));
+    if (!hasType(*exchange.response, "application/problem+json")) return text;
+    const auto problem = foundation::parseJSON(exchange.body);
+    const std::string* const detail = problem ? textIn(*problem, "detail") : nullptr;
+    return detail == nullptr ? text : text + foundation::format(": %@", cutTo(kShownDetail, *detail));
+}
+
+bool isHash(std::string_view text) {
+    return text.size() == kEventDigits &&
+           text.find_first_not_of("0123456789abcdef") == std::string_view::npos;
+}
+
+}  // namespace
+
+std::optional<foundation::URL> serviceURLOf(std::string_view text) {
+    while (text.ends_with('/')) text.remove_suffix(1);
+    const auto url = foundation::URL::fromString(std::string(text) + std::string(kPath));
+    if (!url || url->scheme() != "https" || url->host().empty()) return std::nullopt;
+    const bool isPlain = text.find_first_of("?#@") == std::string_view::npos;
+    return isPlain ? url : std::nullopt;
+}
+
+TicketRequests::TicketRequests(const Platform& platform, RequestOptions options, Cancellation& cancellation)
+    : platform_(platform),
+      options_(std::move(options)),
+      cancellation_(cancellation),
+      connection_(platform_),
+      use_(cancellation_, connection_) {}
+
+RequestedTicket TicketRequests::request(const TicketWish& wish) {
+    const auto begun = Clock::now();
+    RequestedTicket result;
+    FetchedTicket& fetched = result.fetched;
+    const std::string name = nameOf(wish.hashes.front());
+    fetched.recordName = name;
+    if (endedEarly(fetched)) return result;
+    if (lost_) {
+        fetched = *lost_;
+        fetched.recordName = name;
+        return result;
+    }
+    auto body = bodyOf(wish);
+    if (!body) {
+        end(fetched, Cause::notIssued, kExitDataError,
+            foundation::format("The request for %@ cannot be written: label or comment is not UTF-8.", name));
+        return result;
+    }
+    const https::Request request = requestFor(options_.service, *std::move(body));
+    for (unsigned failures = 1;; ++failures) {
+        std::optional<std::chrono::seconds> retryAfter;
+        const Try tried = attempt(wish, request, result, retryAfter);
+        if (fetched.cause == Cause::unreachable && endedEarly(fetched)) break;
+        if (tried == Try::isDone || failures > options_.retry.retries) break;
+        auto due = Clock::now() + options_.retry.delayAfter(failures, retryAfter, randomChance());
+        if (options_.deadline) due = std::min(due, *options_.deadline);
+        cancellation_.sleepUntil(due);
+        if (endedEarly(fetched)) break;
+    }
+    fetched.seconds = std::chrono::duration<double>(Clock::now() - begun).count();
+    return result;
+}
+
+bool TicketRequests::endedEarly(FetchedTicket& result) const {
+    const bool isLate = options_.deadline && Clock::now() >= *options_.deadline;
+    if (!isLate && !cancellation_.isCancelled()) return false;
+    result.cause = isLate ? Cause::timedOut : Cause::interrupted;
+    result.exitStatus = kExitNoHost;
+    return true;
+}
+
+TicketRequests::Try TicketRequests::attempt(const TicketWish& wish, const https::Request& request,
+                                            RequestedTicket& result,
+                                            std::optional<std::chrono::seconds>& retryAfter) {
+    FetchedTicket& fetched = result.fetched;
+    const Exchange exchange = connection_.exchange(request, options_.deadline);
+    ++fetched.attempts;
+    fetched.messages = exchange.messages;
+    if (!exchange.error) {
+        lost_.reset();
+        return takeResponse(wish, exchange, result, retryAfter);
+    }
+    end(fetched, exchange.serverWasRefused ? Cause::untrusted : Cause::unreachable, kExitNoHost,
+        foundation::format("error is %@", exchange.error));
+    const bool isLost = !exchange.serverWasRefused && isLoss(*exchange.error);
+    if (isLost || exchange.serverWasRefused ||
+        isCode(*exchange.error, URLErrorCode::secureConnectionFailed)) {
+        lost_ = fetched;
+        lost_->attempts = 0;
+    }
+    return isLost ? Try::mayBeRepeated : Try::isDone;
+}
+
+TicketRequests::Try TicketRequests::takeResponse(const TicketWish& wish, const Exchange& exchange,
+                                                 RequestedTicket& result,
+                                                 std::optional<std::chrono::seconds>& retryAfter) {
+    FetchedTicket& fetched = result.fetched;
+    const int status = exchange.response->status;
+    if (status >= 200 && status < 300) {
+        takeIssued(wish, exchange, result);
+        return Try::isDone;
+    }
+    const std::string problem = problemIn(exchange);
+    if (status == kStatusConflict) {
+        end(fetched, Cause::revoked, kExitNoPermission,
+            foundation::format("No ticket was issued for %@: %@", fetched.recordName, problem));
+        return Try::isDone;
+    }
+    if (status >= 400 && status < 500 && status != kStatusRequestTimeout && !isBusyStatus(status)) {
+        end(fetched, Cause::notIssued, kExitDataError,
+            foundation::format("No ticket was issued for %@: %@", fetched.recordName, problem));
+        return Try::isDone;
+    }
+    end(fetched, Cause::unreachable, kExitNoHost,
+        foundation::format("The service cannot issue a ticket for %@ now: %@", fetched.recordName, problem));
+    retryAfter = retryAfterOf(*exchange.response);
+    return isBusyStatus(status) || status == kStatusRequestTimeout ? Try::mayBeRepeated : Try::isDone;
+}
+
+void TicketRequests::takeIssued(const TicketWish& wish, const Exchange& exchange,
+                                RequestedTicket& result) const {
+    FetchedTicket& fetched = result.fetched;
+    const auto refuse = [&fetched](std::string message) {
+        end(fetched, Cause::notAcceptable, kExitDataError, std::move(message));
+    };
+    const auto document = foundation::parseJSON(exchange.body);
+    const Value issued = document && hasType(*exchange.response, "application/json") ? *document : Value();
+    const std::string* const record = textIn(issued, "record");
+    const std::string* const action = textIn(issued, "action");
+    const std::string* const event = textIn(issued, "event");
+    const std::string* const text = textIn(issued, "ticket");
+    if (record == nullptr || action == nullptr || event == nullptr || text == nullptr || !isHash(*event) ||
+        std::find(kActions.begin(), kActions.end(), *action) == kActions.end())
+        return refuse(foundation::format("The service's answer for %@ does not have the form of one.",
+                                         fetched.recordName));
+    if (*record != fetched.recordName)
+        return refuse(foundation::format("The service's answer for %@ is about another record, %@.",
+                                         fetched.recordName, cutTo(kShownDetail, *record)));
+    auto ticket = foundation::decodeBase64(*text);
+    std::vector<foundation::Data> hashes;
+    for (const CodeHash& hash : wish.hashes) hashes.push_back(hash.hash);
+    switch (judgeTicket(ticket, hashes, platform_.trust)) {
+        case TicketVerdict::acceptable:
+            fetched.cause = Cause::worked;
+            fetched.exitStatus = kExitOK;
+            break;
+        case TicketVerdict::revoked:
+            end(fetched, Cause::revoked, kExitNoPermission,
+                foundation::format(
+                    "The ticket for %@ has been revoked. Tollmark will prevent it from running.",
+                    fetched.recordName));
+            break;
+        case TicketVerdict::refused:
+            return refuse(foundation::format("Could not validate ticket for %@", fetched.recordName));
+    }
+    fetched.ticket = *std::move(ticket);
+    result.action = *action;
+    result.event = *event;
+}
+
+}  // namespace pinwell::retrieval
