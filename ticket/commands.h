@@ -2,9 +2,11 @@
 #pragma once
 
 #include <functional>
+#include <memory>
 #include <string>
 
 #include "companion/output.h"
+#include "https/client_identity.h"
 #include "retrieval/report.h"
 #include "src/platform.h"
 #include "ticket/settings.h"
@@ -48,6 +50,11 @@ int hash(const Settings& settings, const Platform& platform);
 
 /// Fetches the tickets of records into a directory, with an index.
 int fetch(const Settings& settings, const Platform& platform);
+
+/// Has a record service issue tickets for artefacts and keeps them in a directory, with an index. `identity`
+/// is who asks.
+int request(const Settings& settings, const Platform& platform,
+            std::shared_ptr<const https::ClientIdentity> identity);
 
 /// Attaches tickets from files. No network.
 int attach(const Settings& settings, const Platform& platform);

@@ -1,36 +1,22 @@
-#include <sys/stat.h>
 #include <sysexits.h>
 
 #include <atomic>
-#include <cerrno>
-#include <ctime>
+#include <optional>
 #include <set>
 #include <utility>
 
-#include "codesign/digest.h"
 #include "companion/ending_signals.h"
 #include "companion/path_list.h"
-#include "foundation/format.h"
 #include "retrieval/ticket_fetch.h"
 #include "ticket/artefact.h"
 #include "ticket/commands.h"
-#include "ticket/file_writing.h"
-#include "ticket/index.h"
+#include "ticket/ticket_directory.h"
 
 namespace pinwell::ticket_files {
 namespace {
 
 using retrieval::Cause;
 using retrieval::Report;
-
-std::string timeText() {
-    const std::time_t now = std::time(nullptr);
-    std::tm utc{};
-    ::gmtime_r(&now, &utc);
-    std::array<char, 32> text{};
-    const std::size_t length = std::strftime(text.data(), text.size(), "%Y-%m-%dT%H:%M:%SZ", &utc);
-    return {text.data(), length};
-}
 
 /// One run of the command.
 class Fetching {
@@ -58,28 +44,20 @@ class Fetching {
                                         take(index, std::move(ticket));
                                     });
         }
-        if (const auto written = index_.write(*settings_.output); !written)
-            reporter_.complain("the index cannot be written: " + written.error().localizedDescription(),
-                               kExitCannotCreate);
+        if (const auto closed = directory_->close(); !closed)
+            reporter_.complain(closed.error().localizedFailureReason(), kExitCannotCreate);
         const int status = reporter_.exitStatus();
         return signal_ != 0 ? companion::kSignalBase + signal_ : status;
     }
 
   private:
     bool prepare() {
-        if (::mkdir(settings_.output->c_str(), 0777) != 0 && errno != EEXIST) {
-            reporter_.complain("the directory cannot be made: " +
-                                   foundation::Error::posix(errno, *settings_.output).localizedDescription(),
-                               kExitCannotCreate);
+        auto directory = TicketDirectory::open(*settings_.output);
+        if (!directory) {
+            reporter_.complain(directory.error().localizedFailureReason(), kExitCannotCreate);
             return false;
         }
-        auto index = Index::read(*settings_.output);
-        if (!index) {
-            reporter_.complain("the index cannot be used: " + index.error().localizedDescription(),
-                               kExitCannotCreate);
-            return false;
-        }
-        index_ = *std::move(index);
+        directory_ = *std::move(directory);
         signals_ = companion::takeEndingSignals();
         return true;
     }
@@ -145,32 +123,15 @@ class Fetching {
         report.attempts = ticket.attempts;
         report.seconds = ticket.seconds;
         report.messages = std::move(ticket.messages);
-        if (!ticket.ticket.empty()) keep(ticket, report);
+        if (!ticket.ticket.empty()) directory_->keep(ticket, report);
         reporter_.report(report);
         report = {};
-    }
-
-    void keep(const retrieval::FetchedTicket& ticket, Report& report) {
-        const std::string file = fileNameOfRecord(ticket.recordName);
-        report.file = file;
-        if (const auto written = replaceFile(ticket.ticket, *settings_.output + "/" + file); !written) {
-            report.messages.push_back(foundation::format("Could not write the ticket to %@. %@", file,
-                                                         written.error().localizedFailureReason()));
-            report.exitStatus = retrieval::worseStatus(report.exitStatus, kExitCannotCreate);
-            if (report.exitStatus == kExitCannotCreate) report.cause = Cause::notWritable;
-            return;
-        }
-        if (ticket.cause == Cause::worked)
-            report.messages.push_back(foundation::format("The ticket has been written to %@.", file));
-        index_.set(ticket.recordName,
-                   {file, foundation::toHex(codesign::digest(codesign::DigestType::sha256, ticket.ticket)),
-                    timeText(), ticket.cause == Cause::revoked});
     }
 
     const Settings& settings_;
     const Platform platform_;
     Reporter reporter_;
-    Index index_;
+    std::optional<TicketDirectory> directory_;
     foundation::FileDescriptor signals_;
     std::atomic<int> signal_ = 0;  // the one that has come
     std::set<std::string> known_;

@@ -5,17 +5,22 @@
 #include <array>
 #include <csignal>
 #include <exception>
+#include <memory>
 #include <string_view>
 #include <utility>
 
 #include "companion/command_line.h"
 #include "foundation/process.h"
+#include "foundation/utf8.h"
+#include "https/client_identity.h"
+#include "retrieval/ticket_request.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"
 #include "src/host_platform.h"
 #include "src/messages.h"
 #include "ticket/commands.h"
+#include "trust/openssl_memory.h"
 
 namespace {
 
@@ -66,7 +71,8 @@ std::vector<Option> withCommon(std::vector<Option> options, Settings& settings) 
     return options;
 }
 
-std::vector<Option> fetchOptions(Settings& settings) {
+// Of the commands that ask a service for many tickets and keep them.
+std::vector<Option> manyOptions(Settings& settings) {
     return {
         text("from", 0, "FILE", "Read names from a file, one a line; - is standard input", settings.from),
         flag("null", '0', "A zero byte ends each name of that file, not a newline",
@@ -81,8 +87,6 @@ std::vector<Option> fetchOptions(Settings& settings) {
          }},
         {"retry-delay", 0, "SECONDS", "Before the first of these tries; doubled each time (default: 1)",
          [&](const std::string& given) { return companion::takeSeconds(given, settings.retry.firstDelay); }},
-        {"wait", 0, "SECONDS", "Ask again for so long for tickets that are not issued yet",
-         [&](const std::string& given) { return companion::takeSeconds(given, settings.wait); }},
         {"deadline", 0, "SECONDS", "The time that all of them may take",
          [&](const std::string& given) {
              return companion::takeSeconds(given, settings.deadline.emplace());
@@ -90,13 +94,35 @@ std::vector<Option> fetchOptions(Settings& settings) {
     };
 }
 
+std::vector<Option> fetchOptions(Settings& settings) {
+    std::vector<Option> options = manyOptions(settings);
+    options.push_back(
+        {"wait", 0, "SECONDS", "Ask again for so long for tickets that are not issued yet",
+         [&](const std::string& given) { return companion::takeSeconds(given, settings.wait); }});
+    return options;
+}
+
+std::vector<Option> requestOptions(Settings& settings) {
+    std::vector<Option> options{
+        text("url", 0, "URL", "The service's administration listener: https://HOST:PORT (needed)",
+             settings.url),
+        text("cert", 0, "FILE", "This client's certificate, in PEM (needed)", settings.certificate),
+        text("key", 0, "FILE", "Its private key, in PEM, unencrypted (needed)", settings.key),
+        text("label", 0, "TEXT", "What the artefact is, for people (default: its file name)", settings.label),
+        flag("reinstate", 0, "Issue even where the record is revoked; needs --comment", settings.reinstates),
+        text("comment", 0, "TEXT", "For the service's log", settings.comment),
+    };
+    for (Option& option : manyOptions(settings)) options.push_back(std::move(option));
+    return options;
+}
+
 companion::Program programFor(Settings& settings) {
     return {
         .name = kProgramName,
         .help =
-            "Fetches tickets into files, and takes them from there to artefacts and back. Only fetch uses "
-            "the\n"
-            "network.",
+            "Fetches tickets into files, and takes them from there to artefacts and back. Only fetch and "
+            "request\n"
+            "use the network.",
         .epilogue =
             "Exit status: the worst of all, as pinwell's: 77 revoked, 73 not written, 65 no good ticket,\n"
             "66 no artefact, 68 service out of reach, 0 all is well; 64 wrong usage.",
@@ -104,6 +130,8 @@ companion::Program programFor(Settings& settings) {
             {"hash", "PATH...", "Prints the record name of each artefact.", withCommon({}, settings)},
             {"fetch", "NAME...", "Fetches tickets by record name, or for artefacts by their path.",
              withCommon(fetchOptions(settings), settings)},
+            {"request", "PATH...", "Has a record service issue tickets for artefacts.",
+             withCommon(requestOptions(settings), settings)},
             {"attach", "PATH...", "Attaches tickets from files.",
              withCommon({text("tickets", 0, "DIR", "A directory that fetch has filled", settings.tickets),
                          text("ticket", 0, "FILE", "One ticket, for all of the artefacts", settings.ticket)},
@@ -121,12 +149,26 @@ int refuse(const std::string& what) {
     return EX_USAGE;
 }
 
+std::optional<int> refuseRequest(const Settings& settings) {
+    if (!settings.url || !settings.certificate || !settings.key || !settings.output)
+        return refuse("request needs --url URL, --cert FILE, --key FILE and --out DIR");
+    if (!retrieval::serviceURLOf(*settings.url))
+        return refuse("--url: it is no https://HOST:PORT, or holds more than that and a path");
+    if (settings.label && (settings.from || settings.arguments.size() > 1))
+        return refuse("--label is for one artefact");
+    if (settings.reinstates && !settings.comment) return refuse("--reinstate needs --comment TEXT");
+    for (const auto& one : {settings.label, settings.comment})
+        if (one && !foundation::isUTF8(*one)) return refuse("--label and --comment are in UTF-8");
+    return std::nullopt;
+}
+
 // What the options of a command do not say by themselves.
 std::optional<int> refuseUsage(const std::string& command, const Settings& settings) {
     if (settings.arguments.empty() && !settings.from)
         return refuse(command == "fetch" ? "no name is given; name some, or a list of them with --from"
                                          : "no path is given");
     if (command == "fetch" && !settings.output) return refuse("fetch needs --out DIR");
+    if (command == "request") return refuseRequest(settings);
     if (command == "attach" && !settings.tickets && !settings.ticket)
         return refuse("attach needs --tickets DIR or --ticket FILE");
     if (command == "attach" && settings.tickets && settings.ticket)
@@ -150,7 +192,7 @@ sandbox::Confinement rightsFor(const std::string& command, const Settings& setti
         rights.files.push_back({settings.output ? directoryOf(*settings.output) : ".", Access::write});
         return rights;
     }
-    if (command == "fetch") {
+    if (command == "fetch" || command == "request") {
         sandbox::Confinement rights = confinementOfRuns(kOperationValidate, settings.arguments, platform);
         if (settings.from) rights.files.push_back({"/", Access::read});
         // It is made, unless it is there or is a link to another one.
@@ -186,9 +228,21 @@ int run(int argc, char** argv) {
     // Lines are collected an artefact: what is not collected is not printed.
     verboseLevel = settings.isVerbose ? kVerbosityVerbose : kVerbosityQuiet;
     const HostPlatform host([](int) {}, HostPlatform::Connections::kept);
+    // The key's file is out of reach for whatever an artefact may do to the process.
+    std::shared_ptr<const https::ClientIdentity> identity;
+    if (command == "request") {
+        sandbox::forbidCoreDumps();  // they would hold the key
+        auto read = https::ClientIdentity::read(*settings.certificate, *settings.key);
+        if (!read) {
+            companion::complain(kProgramName, read.error().localizedDescription());
+            return EX_NOINPUT;
+        }
+        identity = *std::move(read);
+    }
     giveUpRights(command, settings, host.services());
     if (command == "hash") return hash(settings, host.services());
     if (command == "fetch") return fetch(settings, host.services());
+    if (command == "request") return request(settings, host.services(), std::move(identity));
     if (command == "attach") return attach(settings, host.services());
     if (command == "extract") return extract(settings, host.services());
     return ticket_files::remove(settings, host.services());
@@ -198,6 +252,7 @@ int run(int argc, char** argv) {
 
 int main(int argc, char** argv) {
     mallopt(M_ARENA_MAX, 1);
+    trust::wipeWhatOpenSSLFrees();
     foundation::occupyStandardStreams();
     // A reader that has gone away, and a file that would grow beyond the caller's limit, are failed writes.
     std::signal(SIGPIPE, SIG_IGN);
