@@ -102,6 +102,22 @@ Identity issueServer(const IssuerFiles& root, const std::vector<std::string>& ho
     return toPem(issueCertificate(serverProfile(hosts), &issuer, now), passphrase);
 }
 
+Identity createClientAuthority(Date now, std::string_view passphrase) {
+    const CertificateProfile profile{.commonName = "Lumora Local Clients",
+                                     .basicConstraints = "critical,CA:TRUE,pathlen:0",
+                                     .keyUsage = "critical,keyCertSign,cRLSign"};
+    return toPem(issueCertificate(profile, nullptr, now), passphrase);
+}
+
+Identity issueClient(const IssuerFiles& authority, const std::string& commonName, Date now) {
+    const IssuedCertificate issuer = readIssuer(authority);
+    const CertificateProfile profile{.commonName = commonName,
+                                     .basicConstraints = "critical,CA:FALSE",
+                                     .keyUsage = "critical,digitalSignature",
+                                     .extendedKeyUsage = "clientAuth"};
+    return toPem(issueCertificate(profile, &issuer, now), {});
+}
+
 Identity requestSigner(std::string_view passphrase) {
     const KeyHandle key = makeKey(KeyKind::ellipticCurveP256);
     return {requestCertificate(signerProfile(), key.get()), encodeKey(key.get(), passphrase)};

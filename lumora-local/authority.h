@@ -68,6 +68,13 @@ std::string certifySigner(const IssuerFiles& intermediate, foundation::ByteView 
 Identity issueServer(const IssuerFiles& root, const std::vector<std::string>& hosts, foundation::Date now,
                      std::string_view passphrase);
 
+/// An authority for the certificates of clients, for clients alone: apart from the service's own. The key is
+/// encrypted unless `passphrase` is empty.
+Identity createClientAuthority(foundation::Date now, std::string_view passphrase);
+
+/// A client's certificate (clientAuth) with this common name, and its key in the clear.
+Identity issueClient(const IssuerFiles& authority, const std::string& commonName, foundation::Date now);
+
 /// A fresh signer's key and, in the place of the certificate, the request for one (RFC 2986, PEM).
 Identity requestSigner(std::string_view passphrase);
 

@@ -26,7 +26,6 @@ constexpr int kMaximumIntermediates = 4;
 constexpr int kSecurityLevel = 2;  // 112 bits, whatever the system's configuration says
 constexpr int kFewestRsaBits = 2048;
 constexpr int kMostRsaBits = 8192;
-constexpr std::size_t kMaximumNameLength = 64;  // RFC 5280, appendix A: ub-common-name
 
 using StoreHandle = foundation::Handle<X509_STORE, X509_STORE_free>;
 
@@ -81,13 +80,8 @@ std::optional<std::string> commonNameOf(X509* certificate) {
     const int length = ASN1_STRING_to_UTF8(&bytes, text);
     if (length < 0) return std::nullopt;
     const std::unique_ptr<unsigned char, OpenSSLFree> owner(bytes);
-    const std::string name(reinterpret_cast<const char*>(bytes), static_cast<std::size_t>(length));
-    if (name.empty() || name.size() > kMaximumNameLength || !foundation::isUTF8(name)) return std::nullopt;
-    for (std::string_view rest = name; !rest.empty();) {
-        const std::size_t size = foundation::utf8SequenceLength(rest);
-        if (foundation::isControlCharacter(rest.substr(0, size))) return std::nullopt;
-        rest.remove_prefix(size);
-    }
+    std::string name(reinterpret_cast<const char*>(bytes), static_cast<std::size_t>(length));
+    if (!canNameAClient(name)) return std::nullopt;
     return name;
 }
 
@@ -119,6 +113,16 @@ int judge(X509_STORE_CTX* context, void*) {
 }
 
 }  // namespace
+
+bool canNameAClient(std::string_view name) {
+    if (name.empty() || name.size() > kMaximumClientName) return false;
+    while (!name.empty()) {
+        const std::size_t size = foundation::utf8SequenceLength(name);
+        if (size == 0 || foundation::isControlCharacter(name.substr(0, size))) return false;
+        name.remove_prefix(size);
+    }
+    return true;
+}
 
 void askForClients(SSL_CTX* context, const std::string& authoritiesFile) {
     const StoreHandle store(X509_STORE_new());

@@ -9,6 +9,7 @@
 
 #include <optional>
 #include <string>
+#include <string_view>
 
 #include "foundation/date.h"
 
@@ -16,6 +17,12 @@ struct ssl_st;
 struct ssl_ctx_st;
 
 namespace pinwell::lumora {
+
+/// RFC 5280, appendix A: ub-common-name.
+inline constexpr std::size_t kMaximumClientName = 64;
+
+/// Whether a common name can be a client's.
+bool canNameAClient(std::string_view name);
 
 struct Client {
     std::string name;  // common name

@@ -6,6 +6,7 @@
 #include "foundation/format.h"
 #include "lumora-local/backup.h"
 #include "lumora-local/check_command.h"
+#include "lumora-local/client_authority.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/key_rotation.h"
 #include "lumora-local/service_directory.h"
@@ -55,6 +56,18 @@ void runCertify(UpkeepVerbs& verbs) {
     print(certifySignerElsewhere(directory, verbs.words[0], verbs.key, Date::now()));
 }
 
+void runClientCertificate(UpkeepVerbs& verbs) {
+    const ServiceDirectory directory = openNamed(verbs);
+    if (verbs.words.size() != 1) throw Failure(EX_USAGE, "client-certificate needs one NAME");
+    if (verbs.out.empty()) throw Failure(EX_USAGE, "client-certificate needs --out DIRECTORY");
+    makeClientCertificate(directory, verbs.words[0], verbs.out, Date::now());
+    writeText(
+        format("Made %@/client.pem and %@/client.key for %@.\n"
+               "Give it roles in:  %@/service/access.toml\n"
+               "Let it in with:    serve --admin-listen ADDRESS:PORT --client-ca %@\n",
+               verbs.out, verbs.out, verbs.words[0], directory.path(), clientAuthorityPath(directory)));
+}
+
 void runCheck(UpkeepVerbs& verbs) {
     const auto warning = parseDuration(verbs.warning);
     if (!warning) throw Failure(EX_USAGE, format("%@ is no length of time: 12h, 30d or 8w", verbs.warning));
@@ -98,6 +111,13 @@ void declareUpkeepVerbs(CLI::App& app, UpkeepVerbs& verbs) {
                         "A PEM file: the certificates of signer, intermediate and root");
     certify->add_option("--key", verbs.key, "The key that was certified, a file or a pkcs11: URI");
     certify->callback([&verbs] { runCertify(verbs); });
+
+    CLI::App* client =
+        app.add_subcommand("client-certificate", "Make a certificate for a client of the admin listener");
+    client->add_option("DIR", verbs.directory, kServiceHelpText);
+    client->add_option("NAME", verbs.words, "The client's name, as in access.toml");
+    client->add_option("--out", verbs.out, "The directory to make, with client.pem and client.key");
+    client->callback([&verbs] { runClientCertificate(verbs); });
 
     CLI::App* check = app.add_subcommand("check", "Look keys, certificates and records over");
     check->add_option("DIR", verbs.directory, kServiceHelpText);

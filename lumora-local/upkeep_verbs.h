@@ -1,4 +1,4 @@
-// The commands that look after a service: rotate, certify, check, backup, restore.
+// The commands that look after a service: client-certificate, rotate, certify, check, backup, restore.
 #pragma once
 
 #include <string>
@@ -18,6 +18,7 @@ struct UpkeepVerbs {
     std::string key;
     std::string rootDirectory;
     std::string requestFile;
+    std::string out;
     std::string warning = "30d";
     int exitStatus = 0;  // of the program, once the command has run
 };
