@@ -1,5 +1,5 @@
 #include "foundation/format.h"
-#include "gate/markup.h"
+#include "foundation/markup.h"
 #include "gate/render.h"
 
 namespace pinwell::gate {
@@ -60,10 +60,10 @@ std::string tableOf(const std::vector<Check>& checks, bool worthShowing) {
     for (const Check& check : checks) {
         if (isWorthShowing(check) != worthShowing) continue;
         const std::string outcome(verify::outcomeName(check.outcome));
-        rows += "<tr><td class=\"" + outcome + "\">" + outcome + "</td><td>" + markupText(check.name) +
-                "</td><td>" + markupText(check.place) + "</td><td class=\"value\">" +
-                markupText(check.expected) + "</td><td class=\"value\">" + markupText(check.found) +
-                "</td></tr>\n";
+        rows += "<tr><td class=\"" + outcome + "\">" + outcome + "</td><td>" +
+                foundation::markupText(check.name) + "</td><td>" + foundation::markupText(check.place) +
+                "</td><td class=\"value\">" + foundation::markupText(check.expected) +
+                "</td><td class=\"value\">" + foundation::markupText(check.found) + "</td></tr>\n";
     }
     if (rows.empty()) return {};
     return "<table>\n<thead><tr><th scope=\"col\">Outcome</th><th scope=\"col\">Check</th><th "
@@ -89,9 +89,10 @@ std::string classOf(Verdict verdict) {
 
 std::string sectionOf(const Result& result) {
     const std::vector<Check> checks = verify::flattened(result.checks);
-    std::string html = "<section class=\"" + classOf(result.verdict) + "\">\n<h2>" + markupText(result.path) +
-                       "</h2>\n<div><span class=\"verdict\">" + markupText(verdictName(result.verdict)) +
-                       "</span>: " + markupText(result.conclusion) + "</div>\n" + tableOf(checks, true);
+    std::string html =
+        "<section class=\"" + classOf(result.verdict) + "\">\n<h2>" + foundation::markupText(result.path) +
+        "</h2>\n<div><span class=\"verdict\">" + foundation::markupText(verdictName(result.verdict)) +
+        "</span>: " + foundation::markupText(result.conclusion) + "</div>\n" + tableOf(checks, true);
     const std::string rest = tableOf(checks, false);
     if (!rest.empty())
         html += "<details><summary>All that was as it should be</summary>\n" + rest + "</details>\n";

@@ -1,5 +1,5 @@
 #include "foundation/format.h"
-#include "gate/markup.h"
+#include "foundation/markup.h"
 #include "gate/render.h"
 
 namespace pinwell::gate {
@@ -32,8 +32,8 @@ std::string attributesOf(const Counts& counts) {
 }
 
 std::string bodyOf(const Check& check) {
-    const std::string found = markupText(check.found);
-    const std::string both = "expected: " + markupText(check.expected) + "\nfound: " + found;
+    const std::string found = foundation::markupText(check.found);
+    const std::string both = "expected: " + foundation::markupText(check.expected) + "\nfound: " + found;
     switch (check.outcome) {
         case Outcome::passed:
             return {};
@@ -51,8 +51,8 @@ std::string bodyOf(const Check& check) {
 
 std::string caseOf(const Result& result, const Check& check) {
     const std::string name = check.place.empty() ? check.name : check.name + ": " + check.place;
-    std::string line =
-        "    <testcase classname=\"" + markupText(result.path) + "\" name=\"" + markupText(name) + "\"";
+    std::string line = "    <testcase classname=\"" + foundation::markupText(result.path) + "\" name=\"" +
+                       foundation::markupText(name) + "\"";
     const std::string body = bodyOf(check);
     return line + (body.empty() ? "/>\n" : ">" + body + "</testcase>\n");
 }
@@ -67,10 +67,11 @@ std::string renderJUnit(const std::vector<Result>& results) {
         const Counts counts = countsOf(checks);
         all = {all.tests + counts.tests, all.failures + counts.failures, all.errors + counts.errors,
                all.skipped + counts.skipped};
-        suites += "  <testsuite name=\"" + markupText(result.path) + "\"" + attributesOf(counts) + ">\n";
+        suites += "  <testsuite name=\"" + foundation::markupText(result.path) + "\"" + attributesOf(counts) +
+                  ">\n";
         for (const Check& check : checks) suites += caseOf(result, check);
-        suites += "    <system-out>" + markupText(verdictName(result.verdict)) + ": " +
-                  markupText(result.conclusion) + "</system-out>\n  </testsuite>\n";
+        suites += "    <system-out>" + foundation::markupText(verdictName(result.verdict)) + ": " +
+                  foundation::markupText(result.conclusion) + "</system-out>\n  </testsuite>\n";
     }
     return "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<testsuites name=\"pinwell-gate\"" +
            attributesOf(all) + ">\n" + suites + "</testsuites>\n";

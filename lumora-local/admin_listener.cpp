@@ -8,6 +8,7 @@
 
 #include "foundation/format.h"
 #include "lumora-local/failure.h"
+#include "lumora-local/page_routes.h"
 #include "lumora-local/store_opening.h"
 
 namespace pinwell::lumora {
@@ -36,6 +37,7 @@ std::shared_ptr<const TicketSigner> openSigner(const ServiceDirectory& directory
 AdminRoutes allRoutes(RecordStore& store, SignerInUse signer) {
     AdminRoutes routes = changingRoutes(store, std::move(signer));
     for (AdminRoute& route : readingRoutes(store)) routes.push_back(std::move(route));
+    for (AdminRoute& route : pageRoutes(store)) routes.push_back(std::move(route));
     return routes;
 }
 

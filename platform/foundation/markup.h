@@ -4,10 +4,10 @@
 #include <string>
 #include <string_view>
 
-namespace pinwell::gate {
+namespace pinwell::foundation {
 
 /// In UTF-8, without control characters and without what turns the direction of writing, with the characters
 /// of markup as entities: good between tags and in quoted attributes.
 std::string markupText(std::string_view text);
 
-}  // namespace pinwell::gate
+}  // namespace pinwell::foundation

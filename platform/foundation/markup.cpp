@@ -1,11 +1,11 @@
-#include "gate/markup.h"
+#include "foundation/markup.h"
 
 #include <array>
 #include <utility>
 
 #include "foundation/description.h"
 
-namespace pinwell::gate {
+namespace pinwell::foundation {
 
 namespace {
 
@@ -34,7 +34,7 @@ void replaceAll(std::string& text, std::string_view part, std::string_view other
 
 std::string markupText(std::string_view text) {
     std::string result;
-    for (const char c : foundation::escapeForTerminal(text)) {
+    for (const char c : escapeForTerminal(text)) {
         switch (c) {
             case '&':
                 result += "&amp;";
@@ -63,4 +63,4 @@ std::string markupText(std::string_view text) {
     return result;
 }
 
-}  // namespace pinwell::gate
+}  // namespace pinwell::foundation
