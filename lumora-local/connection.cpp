@@ -38,6 +38,7 @@ constexpr milliseconds kFarewellTimeWhenStopping{
 constexpr std::size_t kFarewellBytes = 4 * 1024 * 1024;
 
 constexpr std::size_t kReadSize = 16 * 1024;
+constexpr std::size_t kFirstReadSize = 1024;  // an idle connection holds so much for what may come
 
 std::string addressOf(const Tcp::endpoint& endpoint) {
     boost::system::error_code ignored;
@@ -75,7 +76,7 @@ Connection::~Connection() {
 }
 
 Tcp::socket& Connection::socket() {
-    return stream_ ? stream_->next_layer() : *plain_;
+    return stream_ ? stream_->next_layer().next_layer() : *plain_;
 }
 
 void Connection::start() {
@@ -101,12 +102,12 @@ void Connection::start() {
 void Connection::handshake() {
     tls_ = context_.tls.current();
     stream_.emplace(*std::exchange(plain_, std::nullopt), *tls_);
-    stream_->async_handshake(asio::ssl::stream_base::server, [self = shared_from_this()](ErrorCode failure) {
+    stream_->next_layer().async_handshake([self = shared_from_this()](ErrorCode failure, std::size_t) {
         if (failure) self->logFailedHandshake(failure);
         if (failure || self->phase_ == Phase::closing) return self->timer_.cancel(), void();
         self->established_ = true;
         if (self->context_.tls.asksForClients()) {
-            self->client_ = clientOf(self->stream_->native_handle());
+            self->client_ = clientOf(self->stream_->next_layer().native_handle());
             if (!self->client_) return self->close(false);
         }
         self->awaitRequest();
@@ -134,7 +135,7 @@ void Connection::awaitRequest() {
     if (buffer_.size() > 0) return beginRequest();
     if (context_.stopping) return close(false);
     limitTime(context_.limits.idleTime);
-    stream_->async_read_some(buffer_.prepare(kReadSize),
+    stream_->async_read_some(buffer_.prepare(kFirstReadSize),
                              [self = shared_from_this()](ErrorCode failure, std::size_t count) {
                                  if (self->phase_ == Phase::closing) return;
                                  if (failure) return self->close(false);
@@ -336,7 +337,7 @@ void Connection::close(bool unread) {
         return;
     }
     limitTime(context_.stopping ? kFarewellTimeWhenStopping : kFarewellTime);
-    stream_->async_shutdown([self = shared_from_this()](ErrorCode) {
+    stream_->next_layer().async_shutdown([self = shared_from_this()](ErrorCode, std::size_t) {
         ErrorCode ignored;
         if (!self->unread_) {
             self->timer_.cancel();

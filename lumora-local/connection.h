@@ -8,11 +8,11 @@
 #include <boost/asio/ip/tcp.hpp>
 #include <boost/asio/steady_timer.hpp>
 #include <boost/beast/core/flat_buffer.hpp>
+#include <boost/beast/core/flat_stream.hpp>
 #include <boost/beast/http/message.hpp>
 #include <boost/beast/http/parser.hpp>
 #include <boost/beast/http/span_body.hpp>
 #include <boost/beast/http/string_body.hpp>
-#include <boost/beast/ssl/ssl_stream.hpp>
 #include <chrono>
 #include <memory>
 #include <optional>
@@ -23,6 +23,7 @@
 #include "lumora-local/connection_table.h"
 #include "lumora-local/http_rules.h"
 #include "lumora-local/server.h"
+#include "lumora-local/tls_stream.h"
 
 namespace pinwell::lumora {
 
@@ -53,7 +54,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
 
   private:
     using ErrorCode = boost::system::error_code;
-    using Stream = boost::beast::ssl_stream<boost::asio::ip::tcp::socket>;
+    using Stream = boost::beast::flat_stream<TlsStream>;  // head and body of an answer in one record
     using Parser = boost::beast::http::request_parser<boost::beast::http::string_body>;
     using Response = boost::beast::http::response<boost::beast::http::span_body<const char>>;
     using Message = boost::beast::http::response<boost::beast::http::string_body>;

@@ -27,7 +27,10 @@ std::shared_ptr<boost::asio::ssl::context> load(const TlsFiles& files) {
     SSL_CTX* native = context->native_handle();
     require(SSL_CTX_set_min_proto_version(native, TLS1_2_VERSION) == 1, "set up TLS");
     SSL_CTX_set_options(native, SSL_OP_NO_RENEGOTIATION | SSL_OP_NO_COMPRESSION);
-    SSL_CTX_set_mode(native, SSL_MODE_RELEASE_BUFFERS);  // an idle connection keeps no record buffers
+    // An idle connection keeps no record buffers; the rest is what TlsStream counts on.
+    SSL_CTX_set_mode(native, SSL_MODE_RELEASE_BUFFERS | SSL_MODE_ENABLE_PARTIAL_WRITE |
+                                 SSL_MODE_ACCEPT_MOVING_WRITE_BUFFER);
+    SSL_CTX_set_read_ahead(native, 1);  // a record in one call of the system
     require(SSL_CTX_use_certificate_chain_file(native, files.certificate.c_str()) == 1,
             "use the certificate in " + files.certificate);
     const KeyHandle key = readKeyFile(files.key, files.passphraseFile);
