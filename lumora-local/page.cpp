@@ -18,9 +18,7 @@ using foundation::markupText;
 
 /// Names and what a form shows for them.
 using Choices = std::array<std::pair<std::string_view, std::string_view>, 3>;
-constexpr Choices kSearches{{{"label", "Beginning of the label"},
-                             {"name", "Beginning of the record's name"},
-                             {"hash", "Hash that the ticket lists"}}};
+constexpr Choices kSearches{{{"label", "Label"}, {"name", "Name"}, {"hash", "Hash"}}};
 
 /// Text of the store, whose direction of writing does not turn what is around it.
 std::string isolated(std::string_view text) {
@@ -57,19 +55,26 @@ std::string formOf(const SearchForm& form, bool isAtFault = false) {
            "<div><label for=\"text\">Search for</label><input id=\"text\" name=\"text\" type=\"search\" "
            "maxlength=\"255\" autocomplete=\"off\" spellcheck=\"false\" value=\"" +
            markupText(form.text) + "\"" +
-           (isAtFault ? " aria-invalid=\"true\" aria-describedby=\"fault\"" : "") +
-           "></div>\n<div><label for=\"by\">As</label><select id=\"by\" name=\"by\">" + searches +
+           (isAtFault ? " aria-invalid=\"true\" aria-describedby=\"fault hint\""
+                      : " aria-describedby=\"hint\"") +
+           "></div>\n<div><label for=\"by\">Among</label><select id=\"by\" name=\"by\">" + searches +
            "</select></div>\n<div><label for=\"environment\">Environment</label><select id=\"environment\" "
            "name=\"environment\">" +
-           environments + "</select></div>\n<button type=\"submit\">Search</button>\n</form>\n";
+           environments +
+           "</select></div>\n<button type=\"submit\">Search</button>\n"
+           "<p id=\"hint\">Labels and names are found by how they begin, hashes that a ticket lists by all "
+           "their "
+           "digits.</p>\n</form>\n";
 }
 
+// Where there is little room, the line breaks between date and time.
 std::string timeOf(Date date) {
     const std::string exact = toRfc3339(date);
-    std::string shown = exact;
-    if (const std::size_t middle = shown.find('T'); middle != std::string::npos) shown[middle] = ' ';
-    if (shown.ends_with('Z')) shown.replace(shown.size() - 1, 1, " UTC");
-    return format("<time datetime=\"%s\">%s</time>", exact, shown);
+    const std::size_t middle = exact.find('T');
+    if (middle == std::string::npos || !exact.ends_with('Z')) return markupText(exact);
+    return format(
+        "<time datetime=\"%s\"><span class=\"unit\">%s</span> <span class=\"unit\">%s UTC</span></time>",
+        exact, exact.substr(0, middle), exact.substr(middle + 1, exact.size() - middle - 2));
 }
 
 std::string stateOf(const Record& record) {

@@ -26,17 +26,17 @@ form { display: flex; flex-wrap: wrap; gap: .8rem; align-items: end; background:
   border-radius: .4rem; }
 form div { display: flex; flex-direction: column; flex: 1 1 10rem; }
 form div:first-child { flex: 3 1 16rem; }
+form p { flex: 1 1 100%; margin: 0; font-size: .9rem; color: var(--quiet); }
 label { font-size: .9rem; font-weight: 600; margin-bottom: .2rem; }
 input, select, button { font: inherit; color: inherit; background: var(--ground); border: 1px solid var(--edge);
   border-radius: .3rem; padding: .45rem .6rem; width: 100%; min-height: 2.75rem; }
 button { width: auto; padding: .45rem 1.4rem; font-weight: 600; cursor: pointer; }
 table { border-collapse: collapse; width: 100%; margin-top: 1rem; }
 caption { text-align: left; font-weight: 600; padding-bottom: .4rem; overflow-wrap: anywhere; }
-th, td { text-align: left; vertical-align: top; padding: .5rem .8rem .5rem 0; border-top: 1px solid var(--line);
-  overflow-wrap: anywhere; }
+th, td { text-align: left; vertical-align: top; padding: .5rem .8rem .5rem 0; border-top: 1px solid var(--line); }
 thead th { border-top: 0; font-size: .9rem; }
-tbody th { font-weight: normal; }
-.wide { white-space: nowrap; overflow-wrap: normal; }
+tbody th { font-weight: normal; overflow-wrap: anywhere; }
+.unit { white-space: nowrap; }
 .code { font: .85em/1.6 ui-monospace, monospace; overflow-wrap: anywhere; display: block; color: var(--quiet); }
 .state { font-weight: 600; }
 .valid { color: var(--good); }
@@ -48,6 +48,7 @@ dt { flex: 0 0 9rem; color: var(--quiet); }
 dd { margin: 0; flex: 1 1 18rem; min-width: 0; overflow-wrap: anywhere; }
 dd ul { margin: 0; padding: 0; list-style: none; }
 .events { padding: 0; list-style: none; }
+.events p { margin: .2rem 0; }
 .events > li { border-top: 1px solid var(--line); padding: .8rem 0; }
 .pages { margin: 1rem 0; display: flex; gap: 1.5rem; }
 .pages a { display: inline-block; padding: .5rem 0; }

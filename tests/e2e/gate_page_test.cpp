@@ -11,6 +11,7 @@
 #include <filesystem>
 #include <thread>
 
+#include "browser.h"
 #include "foundation/byte_reader.h"
 #include "foundation/file_io.h"
 #include "foundation/json.h"
@@ -77,7 +78,7 @@ class EmptyServer {
 class GatePage : public GateRun {
   protected:
     void SetUp() override {
-        if (::access(CHROMIUM_PROGRAM, X_OK) != 0) GTEST_SKIP() << "Chromium is not installed";
+        if (!hasBrowser()) GTEST_SKIP() << "Chromium is not installed";
         GateRun::SetUp();
     }
 
@@ -89,18 +90,7 @@ class GatePage : public GateRun {
     }
 
     ProcessResult chromium(std::vector<std::string> arguments) const {
-        Command run = command(std::move(arguments));
-        run.executable = CHROMIUM_PROGRAM;
-        run.environment["HOME"] = directory.path();
-        run.workingDirectory = directory.path();
-        // The superuser has no sandbox. No name is looked up, so that nothing but loopback is reached.
-        for (const char* const option :
-             {"--headless", "--no-sandbox", "--disable-gpu", "--no-first-run", "--disable-dev-shm-usage",
-              "--disable-background-networking", "--disable-component-update", "--disable-extensions",
-              "--host-resolver-rules=MAP * ~NOTFOUND, EXCLUDE 127.0.0.1", "--timeout=20000"})
-            run.arguments.insert(run.arguments.begin(), option);
-        run.arguments.insert(run.arguments.begin(), "--user-data-dir=" + (directory / "browser"));
-        return runProcess(run);
+        return browse(command({}), directory.path(), std::move(arguments));
     }
 
     /// The document as it is once the browser has made all that it will make of it.

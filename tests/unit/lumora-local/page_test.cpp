@@ -106,11 +106,13 @@ TEST(Page, HasItsPlacesAndNoScriptOrStyleOfItsOwn) {
 TEST(Page, ShowsARecordsStateInWords) {
     RecordView view;
     view.found = found("App");
-    EXPECT_THAT(recordPage(view, kClient),
-                AllOf(HasSubstr("<title>Valid: App - Record service</title>"), HasSubstr("valid\">Valid<"),
-                      HasSubstr("<time datetime=\"2026-11-18T11:06:40Z\">2026-11-18 11:06:40 UTC</time>"),
-                      HasSubstr(recordName(hashOf(2))), HasSubstr("The log has no events here."),
-                      Not(HasSubstr("further")), Not(HasSubstr("<nav"))));
+    EXPECT_THAT(
+        recordPage(view, kClient),
+        AllOf(HasSubstr("<title>Valid: App - Record service</title>"), HasSubstr("valid\">Valid<"),
+              HasSubstr("<time datetime=\"2026-11-18T11:06:40Z\"><span class=\"unit\">2026-11-18</span> "
+                        "<span class=\"unit\">11:06:40 UTC</span></time>"),
+              HasSubstr(recordName(hashOf(2))), HasSubstr("The log has no events here."),
+              Not(HasSubstr("further")), Not(HasSubstr("<nav"))));
     view.found = found("App", true);
     view.found.hashesCut = true;
     EXPECT_THAT(recordPage(view, kClient),
@@ -359,7 +361,7 @@ TEST_F(PageRoutes, SayWhatCannotBeSearchedFor) {
     EXPECT_THAT(
         body("/records?by=hash&text=%3Cscript%3E", 400),
         AllOf(Not(HasSubstr("<script")),
-              HasSubstr("value=\"&lt;script&gt;\" aria-invalid=\"true\" aria-describedby=\"fault\"")));
+              HasSubstr("value=\"&lt;script&gt;\" aria-invalid=\"true\" aria-describedby=\"fault hint\"")));
     put(1, "App");
     body("/records/" + recordName(hashOf(1)) + "?after=x", 400);
 }

@@ -1,0 +1,267 @@
+// The page for people of the administration listener, from the real service and in a browser.
+//
+// The browser has no certificate. A bridge has: it asks the service over TLS and hands status, headers and
+// body of each answer on unchanged, except where a test says so. Skipped without Chromium.
+#include <httplib.h>
+
+#include <filesystem>
+#include <mutex>
+#include <thread>
+
+#include "admin_service.h"
+#include "browser.h"
+#include "foundation/byte_reader.h"
+
+namespace pinwell::test {
+namespace {
+
+using testing::AllOf;
+using testing::Contains;
+using testing::Each;
+using testing::HasSubstr;
+using testing::IsEmpty;
+using testing::Not;
+using testing::StartsWith;
+
+class Bridge {
+  public:
+    /// To the listener at "https://127.0.0.1:PORT", which is verified by this root.
+    Bridge(const std::string& listener, std::string certificate, std::string key, std::string root)
+        : servicePort_(std::stoi(listener.substr(listener.rfind(':') + 1))),
+          certificate_(std::move(certificate)),
+          key_(std::move(key)),
+          root_(std::move(root)) {
+        server_.Get(".*", [this](const httplib::Request& request, httplib::Response& response) {
+            handOn(request.target, response);
+        });
+        port_ = server_.bind_to_any_port("127.0.0.1");
+        if (port_ <= 0) throw std::runtime_error("no port for the bridge");
+        thread_ = std::thread([this] { server_.listen_after_bind(); });
+        while (!server_.is_running()) std::this_thread::yield();  // stop() would have no effect before
+    }
+    ~Bridge() {
+        server_.stop();
+        thread_.join();
+    }
+    Bridge(const Bridge&) = delete;
+    Bridge& operator=(const Bridge&) = delete;
+
+    std::string url(const std::string& target) const {
+        return "http://127.0.0.1:" + std::to_string(port_) + target;
+    }
+    /// Puts markup at the end of each page, with or without the policy that came with the page.
+    void add(std::string markup, bool keepsPolicy) {
+        const std::lock_guard lock(mutex_);
+        added_ = std::move(markup);
+        keepsPolicy_ = keepsPolicy;
+    }
+    std::vector<std::string> targets() const {
+        const std::lock_guard lock(mutex_);
+        return targets_;
+    }
+
+    httplib::Result ask(const std::string& target) const {
+        httplib::SSLClient client("127.0.0.1", servicePort_, certificate_, key_);
+        client.set_ca_cert_path(root_);
+        client.enable_server_certificate_verification(true);
+        client.set_read_timeout(30);
+        return client.Get(target);
+    }
+
+  private:
+    void handOn(const std::string& target, httplib::Response& response) {
+        const httplib::Result answer = ask(target);
+        const std::lock_guard lock(mutex_);
+        targets_.push_back(target);
+        if (!answer) {
+            response.status = 599;
+            return;
+        }
+        response.status = answer->status;
+        const std::string type = answer->get_header_value("Content-Type");
+        std::string body = answer->body;
+        if (type.find("html") != std::string::npos && !added_.empty())
+            body.insert(body.find("</main>"), added_);
+        for (const auto& [name, value] : answer->headers) {
+            const bool isPolicy = name == "Content-Security-Policy";
+            if (name != "Content-Length" && name != "Content-Type" && name != "Connection" &&
+                (!isPolicy || keepsPolicy_))
+                response.set_header(name, value);
+        }
+        response.set_content(body, type);
+    }
+
+    const int servicePort_;
+    const std::string certificate_;
+    const std::string key_;
+    const std::string root_;
+    httplib::Server server_;
+    int port_ = 0;
+    std::thread thread_;
+    mutable std::mutex mutex_;
+    std::string added_;
+    bool keepsPolicy_ = true;
+    std::vector<std::string> targets_;
+};
+
+class AdminPage : public AdminServiceTest {
+  protected:
+    void SetUp() override {
+        if (!hasBrowser()) GTEST_SKIP() << "Chromium is not installed";
+        admit("anna.example", R"("issue", "revoke", "read")");
+        admit("ci.example", R"("issue")");
+        serve();
+        bridge = bridgeOf("anna.example");
+    }
+    void TearDown() override {
+        bridge.reset();
+        AdminServiceTest::TearDown();
+    }
+
+    std::unique_ptr<Bridge> bridgeOf(const std::string& client) const {
+        return std::make_unique<Bridge>(administration(), clientFile(client, "client.pem"),
+                                        clientFile(client, "client.key"),
+                                        serviceDirectory + "/service/root.pem");
+    }
+    /// A record of that label, and its name.
+    std::string issue(const std::string& label) {
+        const std::string digits = std::to_string(1'000'000 + ++issued_);
+        const std::string name = "2/2/" + std::string(40 - digits.size(), '0') + digits;
+        record("issue", {"--record", name, "--label", label});
+        return name;
+    }
+    ProcessResult browser(std::vector<std::string> arguments) const {
+        return browse(command({}), directory.path(), std::move(arguments));
+    }
+    /// The document as it is once the browser has made all that it will make of it.
+    std::string documentAt(const std::string& target, std::vector<std::string> options = {}) const {
+        options.insert(options.end(), {"--dump-dom", bridge->url(target)});
+        const ProcessResult result = browser(std::move(options));
+        EXPECT_EQ(result.exitStatus, 0) << result.errors;
+        return result.output;
+    }
+    /// A page of every kind.
+    std::vector<std::string> everyTarget() {
+        const std::string name = issue("A rather long name of an app " + std::string(200, 'x') + ".app");
+        record("revoke", {name, "--reason", "compromised", "--comment", "the key was lost"});
+        for (int i = 0; i < 60; ++i) issue("Many");
+        return {"/",
+                "/records",
+                "/records?by=label&text=none",
+                "/records/" + name,
+                "/records/2/2/none",
+                "/records?by=hash&text=none"};
+    }
+
+    std::unique_ptr<Bridge> bridge;
+
+  private:
+    int issued_ = 0;
+};
+
+std::string titleOf(const std::string& document) {
+    const std::size_t begin = document.find("<title>") + 7;
+    return document.substr(begin, document.find("</title>") - begin);
+}
+
+TEST_F(AdminPage, LeadsFromTheSearchToTheHistoryOfARecord) {
+    ASSERT_EQ(request("anna.example", {samples[0]}).exitStatus, 0);
+    const std::string label = std::filesystem::path(samples[0]).filename();
+    record("revoke", {samples[0], "--reason", "compromised", "--comment", "the key was lost"});
+    EXPECT_THAT(documentAt("/"), AllOf(HasSubstr("<dt>Records</dt><dd>1</dd>"),
+                                       HasSubstr("<dt>Events in the log</dt><dd>2</dd>"),
+                                       HasSubstr("<bdi>anna.example</bdi>")));
+    const std::string found = documentAt("/records?by=label&text=" + label + "&environment=production");
+    EXPECT_THAT(found, AllOf(HasSubstr("<bdi>" + label + "</bdi></a>"), HasSubstr(">Revoked<")));
+    const std::size_t link = found.find("href=\"/records/2/") + 6;
+    const std::string page = documentAt(found.substr(link, found.find('"', link) - link));
+    EXPECT_THAT(page, AllOf(HasSubstr("<h3>Issued</h3>"), HasSubstr("<h3>Revoked</h3>"),
+                            HasSubstr("the key was lost"), HasSubstr("<dd>compromised</dd>")));
+    EXPECT_EQ(titleOf(page), "Revoked: " + label + " - Record service");
+    // Nothing else was loaded.
+    EXPECT_THAT(bridge->targets(),
+                Each(testing::AnyOf("/", "/style.css", "/favicon.ico", StartsWith("/records"))));
+}
+
+TEST_F(AdminPage, IsForClientsThatMayReadAndHaveACertificate) {
+    EXPECT_EQ(bridgeOf("ci.example")->ask("/")->status, 403);
+    EXPECT_EQ(bridge->ask("/")->status, 200);
+    httplib::SSLClient nobody("127.0.0.1",
+                              std::stoi(administration().substr(administration().rfind(':') + 1)));
+    nobody.set_ca_cert_path(serviceDirectory + "/service/root.pem");
+    EXPECT_FALSE(nobody.Get("/"));
+}
+
+TEST_F(AdminPage, RunsNothingAndLoadsNothingWhateverLabelsAre) {
+    const std::string markup = "<script>document.title='run'</script><img src=\"/loaded\">";
+    const std::string name = issue(markup + "\"'><b onclick=1>");
+    for (const std::string& target : {std::string("/records"), "/records/" + name}) {
+        EXPECT_THAT(documentAt(target), AllOf(HasSubstr("&lt;script&gt;"), Not(HasSubstr("<script")),
+                                              Not(HasSubstr("<img")), Not(HasSubstr("<b "))));
+    }
+    EXPECT_THAT(bridge->targets(), Not(Contains("/loaded")));
+
+    // Were something to get into the page, its policy would still allow neither.
+    bridge->add(markup, true);
+    EXPECT_THAT(documentAt("/"),
+                AllOf(HasSubstr("<img"), HasSubstr("<title>Search - Record service</title>")));
+    EXPECT_THAT(bridge->targets(), Not(Contains("/loaded")));
+
+    // Without it, both happen.
+    bridge->add(markup, false);
+    EXPECT_EQ(titleOf(documentAt("/")), "run");
+    EXPECT_THAT(bridge->targets(), Contains("/loaded"));
+}
+
+TEST_F(AdminPage, HasItsStyleAndFitsANarrowScreen) {
+    const std::vector<std::string> targets = everyTarget();
+    bridge->add(
+        "<script>addEventListener('load', () => { const style = getComputedStyle(document.body);"
+        "const small = [...document.querySelectorAll('input, select, button')].filter(one => "
+        "one.getBoundingClientRect().height < 24).length;"
+        "document.title = `${style.marginTop} ${document.documentElement.scrollWidth} of ${innerWidth}, "
+        "${document.documentElement.scrollWidth > innerWidth ? 'too wide' : 'fits'}, ${small} small`; });"
+        "</script>",
+        false);
+    for (const std::string& target : targets)
+        EXPECT_THAT(titleOf(documentAt(target, {"--window-size=400,800"})),
+                    AllOf(StartsWith("0px "), HasSubstr(", fits, 0 small")))
+            << target;
+}
+
+TEST_F(AdminPage, HasNoFaultThatAxeFinds) {
+    const std::string script = AXE_SCRIPT;
+    if (script.empty() || !std::filesystem::exists(script))
+        GTEST_SKIP() << "axe-core is not installed: npm install --global axe-core";
+    const std::vector<std::string> targets = everyTarget();
+    const std::string run =
+        "<script>" + readFile(script) +
+        "</script><script>addEventListener('load', () => axe.run().then(found => { document.title = "
+        "`${found.passes.length > 10 ? 'checked' : 'few'}: ` + found.violations.map(one => one.id + ' ' + "
+        "one.nodes.map(node => node.target).join(' ')).join(', '); }));</script>";
+    bridge->add(run, false);
+    for (const std::string& target : targets)
+        EXPECT_EQ(titleOf(documentAt(target, {"--virtual-time-budget=20000"})), "checked: ") << target;
+
+    // It does find some.
+    bridge->add("<img src=\"/x\"><p style=\"color: #eee; background: #fff\">pale</p>" + run, false);
+    EXPECT_THAT(titleOf(documentAt("/", {"--virtual-time-budget=20000"})),
+                AllOf(HasSubstr("image-alt"), HasSubstr("color-contrast")));
+}
+
+TEST_F(AdminPage, CanBePictured) {
+    const std::string target = everyTarget().at(3);
+    const std::string picture = directory / "picture.png";
+    const ProcessResult result =
+        browser({"--screenshot=" + picture, "--window-size=800,600", bridge->url(target)});
+    ASSERT_EQ(result.exitStatus, 0) << result.errors;
+    const std::string bytes = readFile(picture);
+    ASSERT_GT(bytes.size(), 5000U);  // a blank one has fewer
+    foundation::ByteReader reader(foundation::asBytes(bytes));
+    reader.seek(16, "width");
+    EXPECT_EQ(reader.be32("width"), 800U);
+    EXPECT_EQ(reader.be32("height"), 600U);
+}
+
+}  // namespace
+}  // namespace pinwell::test
