@@ -66,7 +66,7 @@ std::vector<std::string> filesOf(const std::string& root) {
 }
 
 /// Whether a backup may make a file of this name: below service or platform, nothing hidden, no way out.
-bool isName(const fs::path& name) {
+bool isNameInBackup(const fs::path& name) {
     int depth = 0;
     for (const fs::path& part : name) {
         const std::string text = part.string();
@@ -153,7 +153,7 @@ void extractFiles(SQLite::Database& database, const std::string& file, const std
     while (row.executeStep()) {
         const std::string name = row.getColumn(0).getString();
         const std::int64_t size = row.getColumn(1).getInt64();
-        if (!isName(name)) refuse(format("%@ is no file of a service", name));
+        if (!isNameInBackup(name)) refuse(format("%@ is no file of a service", name));
         if (++count > kMaximumBackedUpFiles) refuse("it holds too many files");
         if (size < 0 || size > std::int64_t{kMaximumBackedUpFile} || row.getColumn(2).getInt64() != size) {
             refuse(format("%@ is compressed or too large", name));
