@@ -62,9 +62,8 @@ std::string formOf(const SearchForm& form, bool isAtFault = false) {
            "name=\"environment\">" +
            environments +
            "</select></div>\n<button type=\"submit\">Search</button>\n"
-           "<p id=\"hint\">Labels and names are found by how they begin, hashes that a ticket lists by all "
-           "their "
-           "digits.</p>\n</form>\n";
+           "<p id=\"hint\">Labels and names are found by how they begin, a ticket by every digit of a hash "
+           "that it lists. Labels tell capitals from small letters.</p>\n</form>\n";
 }
 
 // Where there is little room, the line breaks between date and time.

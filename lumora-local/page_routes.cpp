@@ -49,6 +49,10 @@ SearchForm formIn(const Query& query) {
     form.text = trimmed(valueIn(query, "text"));
     for (const std::string_view by : {"name", "hash"})
         if (valueIn(query, "by") == by) form.by = by;
+    // Digits are pasted from anywhere; names and hashes have them in lower case.
+    if (form.by != "label")
+        for (char& digit : form.text)
+            if (digit >= 'A' && digit <= 'F') digit = static_cast<char>(digit - 'A' + 'a');
     form.environment = parseEnvironment(valueIn(query, "environment")).value_or(Environment::production);
     return form;
 }

@@ -228,7 +228,7 @@ int run(int argc, char** argv) {
     // Lines are collected an artefact: what is not collected is not printed.
     verboseLevel = settings.isVerbose ? kVerbosityVerbose : kVerbosityQuiet;
     const HostPlatform host([](int) {}, HostPlatform::Connections::kept);
-    // The key's file is out of reach for whatever an artefact may do to the process.
+    // Read while its file may be: afterwards the program opens what artefacts and tickets need.
     std::shared_ptr<const https::ClientIdentity> identity;
     if (command == "request") {
         sandbox::forbidCoreDumps();  // they would hold the key

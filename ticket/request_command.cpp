@@ -94,7 +94,6 @@ class Requesting {
     void requestFor(const std::string& path, retrieval::TicketRequests& requests) {
         OpenedArtefact artefact = openArtefact(path, "request", platform_);
         Report& report = artefact.report;
-        report.attempts = 0;
         if (artefact.file != nullptr && artefact.hash.empty()) {
             report.exitStatus = EX_NOINPUT;
             report.cause = Cause::notSigned;

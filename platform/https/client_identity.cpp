@@ -5,13 +5,10 @@
 #include <openssl/ssl.h>
 #include <openssl/x509.h>
 
-#include "foundation/bytes.h"
-#include "foundation/file_io.h"
 #include "foundation/format.h"
 #include "foundation/handle.h"
 #include "foundation/secret_file.h"
 #include "https/server_trust.h"
-#include "trust/pem.h"
 
 namespace pinwell::https {
 namespace {
@@ -41,13 +38,6 @@ Error wrongFile(std::string text) {
     return {foundation::kDataErrorDomain, foundation::kMalformedDocument, std::move(text)};
 }
 
-CertificateHandle certificateOf(const foundation::Data& der) {
-    const auto* bytes = static_cast<const unsigned char*>(static_cast<const void*>(der.data()));
-    const unsigned char* const end = bytes + der.size();
-    CertificateHandle certificate(d2i_X509(nullptr, &bytes, static_cast<long>(der.size())));
-    return bytes == end ? std::move(certificate) : nullptr;
-}
-
 // Asked only for an encrypted key, before anything is made of it.
 int refusePassphrase(char*, int, int, void* asked) {
     *static_cast<bool*>(asked) = true;
@@ -73,18 +63,15 @@ struct Certificates {
     ListHandle issuers;
 };
 
+// One file may hold the key as well: all of it is wiped, like what OpenSSL makes of it.
 Result<Certificates> readCertificates(const std::string& path) {
-    const auto contents = foundation::readSmallFile(path, kMaximumIdentityCertificates);
-    if (!contents) return contents.error();
-    const std::string text = foundation::toString(*contents);
+    const auto room = std::make_unique<foundation::WipedRoom<kMaximumIdentityCertificates + 1>>();
+    const auto length = foundation::readSecretFile(path, room->bytes());
+    if (!length) return length.error();
+    const BioHandle pem(BIO_new_mem_buf(room->bytes().data(), static_cast<int>(*length)));
     Certificates certificates{nullptr, ListHandle(sk_X509_new_null())};
     std::size_t count = 0;
-    for (const trust::PemBlock& block : trust::readPemBlocks(text)) {
-        if (!trust::isCertificateBlock(block)) continue;
-        CertificateHandle certificate = block.data ? certificateOf(*block.data) : nullptr;
-        if (!certificate)
-            return wrongFile(
-                foundation::format("The certificate in line %zu of %@ cannot be read.", block.line, path));
+    while (CertificateHandle certificate{PEM_read_bio_X509(pem.get(), nullptr, nullptr, nullptr)}) {
         if (++count > kMaximumPeerCertificates)
             return wrongFile(foundation::format("There are more than %zu certificates in %@.",
                                                 kMaximumPeerCertificates, path));
@@ -93,6 +80,8 @@ Result<Certificates> readCertificates(const std::string& path) {
         else if (sk_X509_push(certificates.issuers.get(), certificate.get()) > 0)
             static_cast<void>(certificate.release());  // the list has it
     }
+    if (ERR_GET_REASON(ERR_peek_last_error()) != PEM_R_NO_START_LINE)
+        return wrongFile(foundation::format("Certificate number %zu in %@ cannot be read.", count + 1, path));
     if (!certificates.own) return wrongFile(foundation::format("There is no certificate in %@.", path));
     return certificates;
 }

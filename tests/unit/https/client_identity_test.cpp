@@ -151,7 +151,21 @@ TEST_F(ClientIdentityTest, RefusesFilesThatHoldNone) {
         EXPECT_THAT(fault(), HasSubstr("There is no certificate in " + certificate));
     }
     writeFile(certificate, toPem("CERTIFICATE", foundation::toData("no certificate")));
-    EXPECT_THAT(fault(), HasSubstr("The certificate in line 1 of " + certificate + " cannot be read"));
+    EXPECT_THAT(fault(), HasSubstr("Certificate number 1 in " + certificate + " cannot be read"));
+}
+
+TEST_F(ClientIdentityTest, RefusesACertificateThatIsCutBehindAGoodOne) {
+    writeFile(certificate, chain.leaf.pem() + chain.intermediate.pem().substr(0, 200));
+    EXPECT_THAT(fault(), HasSubstr("Certificate number 2 in " + certificate + " cannot be read"));
+}
+
+TEST_F(ClientIdentityTest, MayBeInOneFileWithItsKey) {
+    for (const std::string& text : {chain.leaf.key.pem() + chain.serverPem(),
+                                    "some text\n" + chain.serverPem() + chain.leaf.key.pem()}) {
+        writeFile(certificate, std::string_view(text));
+        writeFile(key, std::string_view(text));
+        EXPECT_EQ(fault(), "");
+    }
 }
 
 TEST_F(ClientIdentityTest, RefusesFilesThatAreTooLong) {

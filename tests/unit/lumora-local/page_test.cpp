@@ -301,6 +301,11 @@ TEST_F(PageRoutes, FindRecordsByNameLabelAndHash) {
     for (int i = 0; i < 48; ++i) listed += "09";
     EXPECT_THAT(body("/records?by=hash&text=" + listed), AllOf(HasSubstr("Alpha"), HasSubstr("Beta")));
     EXPECT_THAT(body("/records"), AllOf(HasSubstr("Alpha"), HasSubstr("Beta")));
+    put(0xAB, "Gamma");
+    std::string pasted;
+    for (int i = 0; i < 20; ++i) pasted += "AB";
+    EXPECT_THAT(body("/records?by=hash&text=" + pasted), HasSubstr("Gamma"));
+    EXPECT_THAT(body("/records?by=name&text=2/2/" + pasted), HasSubstr("Gamma"));
     EXPECT_THAT(body("/records?environment=development"), HasSubstr("there are none"));
 }
 
