@@ -404,6 +404,8 @@ int main(int argc, char** argv) {
     sandbox::forbidCoreDumps();  // they would hold the keys
     // A client that has gone away is an error of one write, not the end of the service.
     std::signal(SIGPIPE, SIG_IGN);
+    // So is a file that may not grow any more.
+    std::signal(SIGXFSZ, SIG_IGN);
     try {
         return run(argc, argv);
     } catch (const Failure& failure) {
