@@ -45,7 +45,7 @@ bool isLoss(const foundation::Error& error) {
                        [&error](URLErrorCode code) { return isCode(error, code); });
 }
 
-void end(FetchedTicket& result, Cause cause, int status, std::string message) {
+void finish(FetchedTicket& result, Cause cause, int status, std::string message) {
     result.cause = cause;
     result.exitStatus = status;
     result.messages.push_back(std::move(message));
@@ -145,7 +145,7 @@ RequestedTicket TicketRequests::request(const TicketWish& wish) {
     FetchedTicket& fetched = result.fetched;
     const std::string name = nameOf(wish.hashes.front());
     fetched.recordName = name;
-    if (endedEarly(fetched)) return result;
+    if (hasEnded(fetched)) return result;
     if (lost_) {
         fetched = *lost_;
         fetched.recordName = name;
@@ -153,7 +153,8 @@ RequestedTicket TicketRequests::request(const TicketWish& wish) {
     }
     auto body = bodyOf(wish);
     if (!body) {
-        end(fetched, Cause::notIssued, kExitDataError,
+        finish(
+            fetched, Cause::notIssued, kExitDataError,
             foundation::format("The request for %@ cannot be written: label or comment is not UTF-8.", name));
         return result;
     }
@@ -161,21 +162,27 @@ RequestedTicket TicketRequests::request(const TicketWish& wish) {
     for (unsigned failures = 1;; ++failures) {
         std::optional<std::chrono::seconds> retryAfter;
         const Try tried = attempt(wish, request, result, retryAfter);
-        if (fetched.cause == Cause::unreachable && endedEarly(fetched)) break;
+        if (fetched.cause == Cause::unreachable && hasEnded(fetched)) break;
         if (tried == Try::isDone || failures > options_.retry.retries) break;
         auto due = Clock::now() + options_.retry.delayAfter(failures, retryAfter, randomChance());
         if (options_.deadline) due = std::min(due, *options_.deadline);
         cancellation_.sleepUntil(due);
-        if (endedEarly(fetched)) break;
+        if (hasEnded(fetched)) break;
     }
     fetched.seconds = std::chrono::duration<double>(Clock::now() - begun).count();
     return result;
 }
 
-bool TicketRequests::endedEarly(FetchedTicket& result) const {
-    const bool isLate = options_.deadline && Clock::now() >= *options_.deadline;
-    if (!isLate && !cancellation_.isCancelled()) return false;
-    result.cause = isLate ? Cause::timedOut : Cause::interrupted;
+std::optional<Cause> TicketRequests::end() const {
+    if (options_.deadline && Clock::now() >= *options_.deadline) return Cause::timedOut;
+    if (cancellation_.isCancelled()) return Cause::interrupted;
+    return std::nullopt;
+}
+
+bool TicketRequests::hasEnded(FetchedTicket& result) const {
+    const std::optional<Cause> why = end();
+    if (!why) return false;
+    result.cause = *why;
     result.exitStatus = kExitNoHost;
     return true;
 }
@@ -191,8 +198,8 @@ TicketRequests::Try TicketRequests::attempt(const TicketWish& wish, const https:
         lost_.reset();
         return takeResponse(wish, exchange, result, retryAfter);
     }
-    end(fetched, exchange.serverWasRefused ? Cause::untrusted : Cause::unreachable, kExitNoHost,
-        foundation::format("error is %@", exchange.error));
+    finish(fetched, exchange.serverWasRefused ? Cause::untrusted : Cause::unreachable, kExitNoHost,
+           foundation::format("error is %@", exchange.error));
     const bool isLost = !exchange.serverWasRefused && isLoss(*exchange.error);
     if (isLost || exchange.serverWasRefused ||
         isCode(*exchange.error, URLErrorCode::secureConnectionFailed)) {
@@ -213,16 +220,17 @@ TicketRequests::Try TicketRequests::takeResponse(const TicketWish& wish, const E
     }
     const std::string problem = problemIn(exchange);
     if (status == kStatusConflict) {
-        end(fetched, Cause::revoked, kExitNoPermission,
-            foundation::format("No ticket was issued for %@: %@", fetched.recordName, problem));
+        finish(fetched, Cause::revoked, kExitNoPermission,
+               foundation::format("No ticket was issued for %@: %@", fetched.recordName, problem));
         return Try::isDone;
     }
     if (status >= 400 && status < 500 && status != kStatusRequestTimeout && !isBusyStatus(status)) {
-        end(fetched, Cause::notIssued, kExitDataError,
-            foundation::format("No ticket was issued for %@: %@", fetched.recordName, problem));
+        finish(fetched, Cause::notIssued, kExitDataError,
+               foundation::format("No ticket was issued for %@: %@", fetched.recordName, problem));
         return Try::isDone;
     }
-    end(fetched, Cause::unreachable, kExitNoHost,
+    finish(
+        fetched, Cause::unreachable, kExitNoHost,
         foundation::format("The service cannot issue a ticket for %@ now: %@", fetched.recordName, problem));
     retryAfter = retryAfterOf(*exchange.response);
     return isBusyStatus(status) || status == kStatusRequestTimeout ? Try::mayBeRepeated : Try::isDone;
@@ -232,7 +240,7 @@ void TicketRequests::takeIssued(const TicketWish& wish, const Exchange& exchange
                                 RequestedTicket& result) const {
     FetchedTicket& fetched = result.fetched;
     const auto refuse = [&fetched](std::string message) {
-        end(fetched, Cause::notAcceptable, kExitDataError, std::move(message));
+        finish(fetched, Cause::notAcceptable, kExitDataError, std::move(message));
     };
     const auto document = foundation::parseJSON(exchange.body);
     const Value issued = document && hasType(*exchange.response, "application/json") ? *document : Value();
@@ -256,10 +264,10 @@ void TicketRequests::takeIssued(const TicketWish& wish, const Exchange& exchange
             fetched.exitStatus = kExitOK;
             break;
         case TicketVerdict::revoked:
-            end(fetched, Cause::revoked, kExitNoPermission,
-                foundation::format(
-                    "The ticket for %@ has been revoked. Tollmark will prevent it from running.",
-                    fetched.recordName));
+            finish(fetched, Cause::revoked, kExitNoPermission,
+                   foundation::format(
+                       "The ticket for %@ has been revoked. Tollmark will prevent it from running.",
+                       fetched.recordName));
             break;
         case TicketVerdict::refused:
             return refuse(foundation::format("Could not validate ticket for %@", fetched.recordName));

@@ -67,6 +67,9 @@ class TicketRequests {
     /// trusted, later wishes end so without being asked for.
     RequestedTicket request(const TicketWish& wish);
 
+    /// Why no wish is asked for any more: timedOut or interrupted. `nullopt` if the time is not up.
+    std::optional<Cause> end() const;
+
   private:
     enum class Try : std::uint8_t { isDone, mayBeRepeated };
     Try attempt(const TicketWish& wish, const https::Request& request, RequestedTicket& result,
@@ -74,7 +77,7 @@ class TicketRequests {
     Try takeResponse(const TicketWish& wish, const Exchange& exchange, RequestedTicket& result,
                      std::optional<std::chrono::seconds>& retryAfter);
     void takeIssued(const TicketWish& wish, const Exchange& exchange, RequestedTicket& result) const;
-    bool endedEarly(FetchedTicket& result) const;
+    bool hasEnded(FetchedTicket& result) const;
 
     const Platform platform_;
     const RequestOptions options_;

@@ -10,6 +10,7 @@
 #include "foundation/format.h"
 #include "https/session_options.h"
 #include "retrieval/ticket_request.h"
+#include "src/PWHashedFile/PWHashedFile.h"
 #include "src/code_hashes.h"
 #include "ticket/artefact.h"
 #include "ticket/commands.h"
@@ -23,6 +24,8 @@ using retrieval::Report;
 
 // A ticket of 16 MiB, its certificates, in base64, and what is around it.
 constexpr std::size_t kLargestAnswer = std::size_t{24} * 1024 * 1024;
+
+constexpr std::string_view kOperation = "request";
 
 Platform withSessions(const Platform& platform, https::SessionService& sessions) {
     return {platform.files,        platform.types,     platform.codeSigning, platform.trust,      sessions,
@@ -82,7 +85,10 @@ class Requesting {
         companion::PathList::State state{};
         while ((state = list.nextOrWait(path)) == companion::PathList::State::path) {
             isEmpty = false;
-            requestFor(path, requests);
+            if (const auto why = requests.end())
+                leaveOut(path, *why);
+            else
+                requestFor(path, requests);
         }
         if (state == companion::PathList::State::broken)
             reporter_.complain("the list cannot be read any further: " + list.error()->localizedDescription(),
@@ -91,8 +97,18 @@ class Requesting {
             reporter_.complain("the list holds no path", EX_USAGE);
     }
 
+    // Reading an artefact can take long.
+    void leaveOut(const std::string& path, Cause why) {
+        Report report;
+        report.path = path;
+        report.operation = kOperation;
+        report.cause = why;
+        report.exitStatus = why == Cause::interrupted ? companion::kSignalBase + signal_ : kExitNoHost;
+        reporter_.report(report);
+    }
+
     void requestFor(const std::string& path, retrieval::TicketRequests& requests) {
-        OpenedArtefact artefact = openArtefact(path, "request", platform_);
+        OpenedArtefact artefact = openArtefact(path, kOperation, platform_);
         Report& report = artefact.report;
         if (artefact.file != nullptr && artefact.hash.empty()) {
             report.exitStatus = EX_NOINPUT;

@@ -275,12 +275,12 @@ TEST_F(TicketRequest, EndsAtItsDeadlineAndWithASignal) {
     expectValid(late);
     const Gate gate;
     service().enqueue(Script().readRequest().waitFor(gate));
-    RunningProcess run(ticketCommand(withService({"--json", images[0].path})));
+    RunningProcess run(ticketCommand(withService({"--json", images[0].path, images[1].path, "missing.dmg"})));
     ASSERT_TRUE(gate.waitUntilReached());
     run.sendSignal(SIGINT);
     const ProcessResult result = run.wait();
     EXPECT_EQ(result.exitStatus, 130);
-    EXPECT_EQ(*reportsOf(result).at(0)["cause"].string(), "interrupted");
+    EXPECT_THAT(reportsOf(result), AllOf(SizeIs(3), Each(Reports("interrupted", 130))));
     expectValid(result);
 }
 

@@ -406,6 +406,7 @@ TEST_F(Request, EndsAtTheDeadlineWhateverItWaitsFor) {
     EXPECT_EQ(late.fetched.cause, Cause::timedOut);
     EXPECT_EQ(late.fetched.exitStatus, 68);
     EXPECT_EQ(late.fetched.attempts, 0U);
+    EXPECT_EQ(all.end(), Cause::timedOut);
 }
 
 TEST_F(Request, EndsWhenItIsCancelled) {
@@ -418,6 +419,8 @@ TEST_F(Request, EndsWhenItIsCancelled) {
     EXPECT_EQ(all.request(wishFor(1)).fetched.cause, Cause::interrupted);
     canceller.join();
     EXPECT_EQ(all.request(wishFor(2)).fetched.attempts, 0U);
+    EXPECT_EQ(all.end(), Cause::interrupted);
+    EXPECT_EQ(requests().end(), Cause::interrupted);
 }
 
 // Where.
