@@ -2,7 +2,6 @@
 
 #include <SQLiteCpp/SQLiteCpp.h>
 #include <fcntl.h>
-#include <sqlite3.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -18,6 +17,7 @@
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/history.h"
+#include "lumora-local/sqlite_rows.h"
 #include "lumora-local/sqlite_schema.h"
 #include "lumora-local/sqlite_store.h"
 
@@ -38,11 +38,7 @@ auto withDatabase(const std::string& file, Work&& work) {
     try {
         return std::forward<Work>(work)();
     } catch (const SQLite::Exception& error) {
-        const int code = error.getErrorCode() & 0xFF;
-        const int status = code == SQLITE_FULL || code == SQLITE_IOERR ? EX_IOERR
-                           : code == SQLITE_BUSY                       ? EX_TEMPFAIL
-                                                                       : EX_DATAERR;
-        throw Failure(status, format("%@: %s", file, error.what()));
+        throw Failure(exitStatusOfSqlite(error.getErrorCode()), format("%@: %s", file, error.what()));
     }
 }
 

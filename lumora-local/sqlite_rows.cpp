@@ -1,6 +1,7 @@
 #include "lumora-local/sqlite_rows.h"
 
 #include <SQLiteCpp/SQLiteCpp.h>
+#include <sqlite3.h>
 
 #include "foundation/date.h"
 #include "foundation/format.h"
@@ -24,6 +25,29 @@ foundation::Data bytesOf(const SQLite::Column& column) {
 }
 
 }  // namespace
+
+int exitStatusOfSqlite(int code) noexcept {
+    switch (code & 0xFF) {
+        case SQLITE_BUSY:
+        case SQLITE_LOCKED:
+            return EX_TEMPFAIL;
+        case SQLITE_CANTOPEN:
+            return EX_NOINPUT;
+        case SQLITE_CORRUPT:
+        case SQLITE_NOTADB:
+        case SQLITE_FORMAT:
+        case SQLITE_CONSTRAINT:
+        case SQLITE_MISMATCH:
+        case SQLITE_ERROR:  // our own statements fail so where a file lacks a table or a column of ours
+            return EX_DATAERR;
+        case SQLITE_PERM:
+        case SQLITE_READONLY:
+        case SQLITE_AUTH:
+            return EX_NOPERM;
+        default:  // a full disk, or one that fails
+            return EX_IOERR;
+    }
+}
 
 Event readEvent(const SQLite::Statement& row) {
     const auto text = [&](int column) { return row.getColumn(column).getString(); };

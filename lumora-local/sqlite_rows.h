@@ -13,6 +13,9 @@ class Statement;
 
 namespace pinwell::lumora {
 
+/// The exit status for a failure of the library, by its code, extended or not.
+int exitStatusOfSqlite(int code) noexcept;
+
 /// Of the columns `time, actor, action, environment, record, label, reason, comment, ticket, previous, hash`,
 /// from the first column on. Throws Failure (EX_CONFIG) for an action, an environment or a reason that is not
 /// one.

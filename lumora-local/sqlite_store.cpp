@@ -1,7 +1,6 @@
 #include "lumora-local/sqlite_store.h"
 
 #include <SQLiteCpp/SQLiteCpp.h>
-#include <sqlite3.h>
 
 #include <functional>
 #include <limits>
@@ -24,31 +23,13 @@ using foundation::Data;
 using foundation::Date;
 using foundation::format;
 
-int exitStatusFor(int sqliteCode) {
-    switch (sqliteCode & 0xFF) {
-        case SQLITE_BUSY:
-        case SQLITE_LOCKED:
-            return EX_TEMPFAIL;
-        case SQLITE_CANTOPEN:
-            return EX_NOINPUT;
-        case SQLITE_CORRUPT:
-        case SQLITE_NOTADB:
-            return EX_DATAERR;
-        case SQLITE_PERM:
-        case SQLITE_READONLY:
-            return EX_NOPERM;
-        default:
-            return EX_IOERR;
-    }
-}
-
 /// Runs database work; what the library throws becomes a Failure.
 template <class Work>
 auto guarded(Work&& work) {
     try {
         return std::forward<Work>(work)();
     } catch (const SQLite::Exception& error) {
-        throw Failure(exitStatusFor(error.getErrorCode()), format("record store: %s", error.what()));
+        throw Failure(exitStatusOfSqlite(error.getErrorCode()), format("record store: %s", error.what()));
     }
 }
 
@@ -149,6 +130,11 @@ void insertHashes(SQLite::Database& database, Environment environment, const Rec
         bindBlob(statement, 5, hash.hash);
         statement.exec();
     }
+}
+
+void walkEvents(SQLite::Database& database, const std::function<void(const Event&)>& visit) {
+    SQLite::Statement row(database, std::string("SELECT ") + kEventColumns + " FROM event ORDER BY position");
+    while (row.executeStep()) visit(readEvent(row));
 }
 
 constexpr const char* kRecordColumns =
@@ -352,9 +338,7 @@ void SqliteStore::forEachEvent(const EventQuery& query, const std::function<void
 void SqliteStore::walkHistory(const HistoryVisitor& visitor) {
     reading([&] {
         const SQLite::Transaction snapshot(*database_);  // both walks see one state; rolled back at the end
-        SQLite::Statement events(*database_,
-                                 std::string("SELECT ") + kEventColumns + " FROM event ORDER BY position");
-        while (events.executeStep()) visitor.event(readEvent(events));
+        walkEvents(*database_, visitor.event);
 
         SQLite::Statement records(
             *database_,
@@ -385,9 +369,7 @@ std::string SqliteStore::headHash() {
 void SqliteStore::walkContents(const ContentsVisitor& visitor) {
     reading([&] {
         const SQLite::Transaction snapshot(*database_);  // rolled back at the end
-        SQLite::Statement events(*database_,
-                                 std::string("SELECT ") + kEventColumns + " FROM event ORDER BY position");
-        while (events.executeStep()) visitor.event(readEvent(events));
+        walkEvents(*database_, visitor.event);
 
         SQLite::Statement records(*database_,
                                   "SELECT name, label, revoked, signed_at, asset IS NOT NULL, ticket,"

@@ -4,6 +4,9 @@
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 
+#include <functional>
+
+#include "lumora-local/backup.h"
 #include "lumora-local/failure.h"
 #include "sample_record.h"
 #include "support/temporary_directory.h"
@@ -42,6 +45,26 @@ TEST_F(SqliteStoreTest, IsReadableByItsOwnerAlone) {
 
 TEST_F(SqliteStoreTest, IsNotMadeOverAnotherFile) {
     EXPECT_THROW(SqliteStore::create(path_), Failure);
+}
+
+int statusOf(const std::function<void()>& work) {
+    try {
+        work();
+        return EX_OK;
+    } catch (const Failure& failure) {
+        return failure.exitStatus();
+    }
+}
+
+TEST_F(SqliteStoreTest, AndBackupsGiveOneExitStatusForOneFault) {
+    const std::string garbage = directory_ / "garbage";
+    writeFile(garbage, std::string(4096, 'x'));
+    EXPECT_EQ(statusOf([&] { SqliteStore store(garbage); }), EX_DATAERR);
+    EXPECT_EQ(statusOf([&] { restore(garbage, directory_ / "restored"); }), EX_DATAERR);
+    // A database, and not ours.
+    SQLite::Database(path_, SQLite::OPEN_READWRITE).exec("DROP TABLE hash; DROP TABLE record");
+    EXPECT_EQ(statusOf([&] { SqliteStore store(path_); }), EX_DATAERR);
+    EXPECT_EQ(statusOf([&] { restore(path_, directory_ / "restored"); }), EX_DATAERR);
 }
 
 TEST_F(SqliteStoreTest, RefusesWhatIsNotAStore) {
