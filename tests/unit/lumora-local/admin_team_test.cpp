@@ -22,7 +22,7 @@ using test::bodyFor;
 using test::PostgresCluster;
 using test::recordNamed;
 
-constexpr const char* kTickets = "/v1/tickets";
+constexpr const char* kTicketsPath = "/v1/tickets";
 
 class AdminTeamTest : public testing::Test {
   protected:
@@ -45,12 +45,12 @@ class AdminTeamTest : public testing::Test {
 TEST_F(AdminTeamTest, GivesARepeatedRequestTheAnswerOfTheOtherInstance) {
     AdminInstance first(service_);
     AdminInstance second(service_);
-    const AdminAnswer issued = first.client("ci.example").post(kTickets, bodyFor(recordNamed(1)), "one");
+    const AdminAnswer issued = first.client("ci.example").post(kTicketsPath, bodyFor(recordNamed(1)), "one");
     ASSERT_EQ(issued.status, 201) << issued.body;
-    const AdminAnswer again = second.client("ci.example").post(kTickets, bodyFor(recordNamed(1)), "one");
+    const AdminAnswer again = second.client("ci.example").post(kTicketsPath, bodyFor(recordNamed(1)), "one");
     EXPECT_EQ(again.status, 201);
     EXPECT_EQ(again.body, issued.body);
-    EXPECT_EQ(second.client("ci.example").post(kTickets, bodyFor(recordNamed(2)), "one").status, 422);
+    EXPECT_EQ(second.client("ci.example").post(kTicketsPath, bodyFor(recordNamed(2)), "one").status, 422);
     EXPECT_EQ(second.client("auditor").get("/v1/events").status, 200);
     PostgresStore store(place_);
     EXPECT_EQ(verifyHistory(store, std::nullopt).events, 2U);
@@ -66,7 +66,7 @@ TEST_F(AdminTeamTest, CarriesARequestOutOnceThatIsSentToBothAtATime) {
             threads.emplace_back([&, side, i] {
                 bodies[side] = (side == 0 ? first : second)
                                    .client("ci.example")
-                                   .post(kTickets, bodyFor(recordNamed(i)), "key-" + std::to_string(i))
+                                   .post(kTicketsPath, bodyFor(recordNamed(i)), "key-" + std::to_string(i))
                                    .body;
             });
         }
@@ -87,7 +87,7 @@ TEST_F(AdminTeamTest, LosesNothingItAcknowledgedWhenTheDatabaseIsKilled) {
         for (int i = 0; i < kRequests; ++i) {
             AdminAnswer answer;
             for (int attempt = 0; attempt < 200 && answer.status != 201; ++attempt) {
-                answer = client.post(kTickets, bodyFor(recordNamed(i)), "key-" + std::to_string(i));
+                answer = client.post(kTicketsPath, bodyFor(recordNamed(i)), "key-" + std::to_string(i));
                 if (answer.status == 201) break;
                 EXPECT_EQ(answer.status, 503) << answer.body;
                 EXPECT_EQ(answer.header("Retry-After"), "1");
