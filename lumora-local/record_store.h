@@ -87,7 +87,7 @@ struct RequestIdentity {
     std::string key;     // by which the client knows the request; of that client alone
     std::string digest;  // of all that the request asks for: text that another request does not have
 };
-inline constexpr std::int64_t kRequestLife = std::int64_t{24} * 60 * 60;  // seconds
+inline constexpr std::int64_t kRequestLife = 24 * 60 * 60;  // seconds
 
 /// Who changes records, when and why. Becomes part of each event.
 struct Occasion {

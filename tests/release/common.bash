@@ -10,7 +10,7 @@ options_in_help() {
 
 # The subcommands in a program's help, one a line.
 subcommands_in_help() {
-  sed -n '/^Subcommands:/,$p' | sed -nE 's/^  ([a-z]+) .*/\1/p'
+  sed -n '/^Subcommands:/,$p' | sed -nE 's/^  ([a-z][a-z-]*) .*/\1/p'
 }
 
 # same WHAT EXPECTED GOT: two lists of one entry a line hold the same, and something.

@@ -29,7 +29,7 @@ std::string with(const std::string& members) {
     return R"({"record":")" + kName + R"(",)" + members + "}";
 }
 
-TEST(TicketRequest, NeedsARecordAlone) {
+TEST(TicketBody, NeedsARecordAlone) {
     const TicketRequest request = parseTicketRequest(R"({"record":")" + kName + R"("})");
     EXPECT_EQ(recordName(request.artefact.own), kName);
     EXPECT_TRUE(request.artefact.others.empty());
@@ -38,7 +38,7 @@ TEST(TicketRequest, NeedsARecordAlone) {
     EXPECT_FALSE(request.reinstates);
 }
 
-TEST(TicketRequest, TakesAllOfItsMembers) {
+TEST(TicketBody, TakesAllOfItsMembers) {
     const TicketRequest request = parseTicketRequest(
         with(R"("hashes":["2/2/)" + std::string(40, 'b') + R"(","2/4/)" + std::string(96, 'c') +
              R"("],"label":"Caf\u00e9.app","environment":"development","reinstate":true,"comment":"why")"));
@@ -50,12 +50,12 @@ TEST(TicketRequest, TakesAllOfItsMembers) {
     EXPECT_EQ(request.comment, "why");
 }
 
-TEST(TicketRequest, IsRefusedIfItIsNoJsonObject) {
+TEST(TicketBody, IsRefusedIfItIsNoJsonObject) {
     for (const char* body : {"", "{", "[]", "null", "1", "\"a\"", "{\"record\":\"\xff\"}", "{} {}"})
         EXPECT_EQ(ticketStatus(body), 400) << body;
 }
 
-TEST(TicketRequest, IsRefusedIfAMemberIsMissingUnknownOrOfAnotherType) {
+TEST(TicketBody, IsRefusedIfAMemberIsMissingUnknownOrOfAnotherType) {
     for (const std::string& body :
          {std::string("{}"), std::string(R"({"record":null})"), std::string(R"({"record":7})"),
           std::string(R"({"record":"2/2/AAAA"})"), R"({"record":"2/9/)" + kHex + R"("})",
@@ -66,7 +66,7 @@ TEST(TicketRequest, IsRefusedIfAMemberIsMissingUnknownOrOfAnotherType) {
     }
 }
 
-TEST(TicketRequest, KeepsToItsBounds) {
+TEST(TicketBody, KeepsToItsBounds) {
     const auto label = [](std::size_t size) { return with(R"("label":")" + std::string(size, 'x') + '"'); };
     EXPECT_EQ(ticketStatus(label(kMaximumLabelBytes)), 0);
     EXPECT_EQ(ticketStatus(label(kMaximumLabelBytes + 1)), 422);
@@ -84,30 +84,30 @@ TEST(TicketRequest, KeepsToItsBounds) {
     EXPECT_EQ(ticketStatus(hashes(kMaximumListedHashes + 1)), 422);
 }
 
-TEST(TicketRequest, HasNoControlCharactersInItsTexts) {
+TEST(TicketBody, HasNoControlCharactersInItsTexts) {
     for (const char* text : {R"(a\nb)", R"(\u0000)", R"(\u001b[2J)", R"(\u007f)", R"(\u0085)"}) {
         EXPECT_EQ(ticketStatus(with(std::string(R"("label":")") + text + '"')), 422) << text;
         EXPECT_EQ(ticketStatus(with(std::string(R"("comment":")") + text + '"')), 422) << text;
     }
 }
 
-TEST(TicketRequest, RefusesHashesThatNoTicketListsTogether) {
+TEST(TicketBody, RefusesHashesThatNoTicketListsTogether) {
     EXPECT_EQ(ticketStatus(with(R"("hashes":["1/)" + kHex + R"("])")), 422);
     EXPECT_EQ(ticketStatus(R"({"record":"1/)" + kHex + R"(","hashes":["1/)" + kHex + R"("]})"), 0);
     EXPECT_EQ(ticketStatus(R"({"record":"1/)" + kHex + R"(","hashes":["2/2/)" + kHex + R"("]})"), 422);
 }
 
-TEST(TicketRequest, NeedsACommentToReinstate) {
+TEST(TicketBody, NeedsACommentToReinstate) {
     EXPECT_EQ(ticketStatus(with(R"("reinstate":true)")), 422);
     EXPECT_EQ(ticketStatus(with(R"("reinstate":true,"comment":"why")")), 0);
     EXPECT_EQ(ticketStatus(with(R"("reinstate":false)")), 0);
 }
 
-TEST(TicketRequest, IsNotNestedDeeply) {
+TEST(TicketBody, IsNotNestedDeeply) {
     EXPECT_EQ(ticketStatus(with("\"hashes\":" + std::string(100'000, '['))), 400);
 }
 
-TEST(RevocationRequest, HasAReasonAndAComment) {
+TEST(RevocationBody, HasAReasonAndAComment) {
     const RevocationRequest request =
         parseRevocationRequest(with(R"("reason":"compromised","comment":"key lost")"));
     EXPECT_EQ(request.record, kName);
@@ -116,7 +116,7 @@ TEST(RevocationRequest, HasAReasonAndAComment) {
     EXPECT_EQ(parseRevocationRequest(R"({"record":")" + kName + R"("})").reason, Reason::unspecified);
 }
 
-TEST(RevocationRequest, IsRefusedIfAMemberIsOutOfBounds) {
+TEST(RevocationBody, IsRefusedIfAMemberIsOutOfBounds) {
     for (const std::string& body : {std::string("{}"), with(R"("reason":"bored")"), with(R"("reason":"")"),
                                     with(R"("hashes":[])"), with(R"("environment":7)")}) {
         EXPECT_EQ(revocationStatus(body), 422) << body;
