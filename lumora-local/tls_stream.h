@@ -9,9 +9,9 @@
 #include <openssl/ssl.h>
 
 #include <boost/asio/compose.hpp>
+#include <boost/asio/defer.hpp>
 #include <boost/asio/error.hpp>
 #include <boost/asio/ip/tcp.hpp>
-#include <boost/asio/post.hpp>
 #include <boost/asio/ssl/context.hpp>
 #include <boost/asio/ssl/error.hpp>
 #include <cerrno>
@@ -123,7 +123,7 @@ class TlsStream {
                 if (began) return self.complete(error, count);
                 // A handler is never called by the function that takes it.
                 done.emplace(error, count);
-                boost::asio::post(socket_.get_executor(), std::move(self));
+                boost::asio::defer(socket_.get_executor(), std::move(self));
             },
             handler, socket_);
     }
