@@ -167,6 +167,19 @@ TEST_F(ConfinedParser, OfTicketFilesDoesNoHarm) {
         program(PINWELL_TICKET_PROGRAM, {"fetch", "--out", directory / "tmp/tickets", application()})));
 }
 
+TEST_F(ConfinedParser, OfARequestDoesNoHarm) {
+    record("client-certificate", {"ci.example", "--out", directory / "client"});
+    // Nobody listens on port 1: artefacts are read before.
+    const ProcessResult result = runProcess(
+        intruded(program(PINWELL_TICKET_PROGRAM,
+                         {"request", "--url", "https://127.0.0.1:1", "--cert",
+                          directory / "client/client.pem", "--key", directory / "client/client.key", "--out",
+                          directory / "tmp/tickets", "--retries", "0", application()}),
+                 "attempts"));
+    EXPECT_EQ(result.exitStatus, 68) << result.output << result.errors;
+    expectHarmless(attempts());
+}
+
 TEST_F(ConfinedParser, OfAnIssueDoesNoHarmAndHasNoNetwork) {
     expectHarmlessWithoutNetwork(attemptsIn(lumoraCommand({"issue", serviceDirectory, application()})));
     expectHarmlessWithoutNetwork(attemptsIn(lumoraCommand({"revoke", serviceDirectory, application()})));
