@@ -54,7 +54,7 @@ std::vector<Option> withCommon(std::vector<Option> options, Settings& settings) 
                        [&](const std::string& given) {
                            static constexpr std::array<std::string_view, 3> kWords{"auto", "always", "never"};
                            std::string word;
-                           const Wrong wrong = companion::takeWord(given, kWords, word);
+                           Wrong wrong = companion::takeWord(given, kWords, word);
                            settings.color = companion::colorWhenNamed(word);
                            return wrong;
                        }});
@@ -81,7 +81,7 @@ std::vector<Option> manyOptions(Settings& settings) {
         {"retries", 0, "N", "How often to try again what is out of reach (default: 5)",
          [&](const std::string& given) {
              std::uint64_t number = 0;
-             const Wrong wrong = companion::takeCount(given, 0, kMostRetries, number);
+             Wrong wrong = companion::takeCount(given, 0, kMostRetries, number);
              settings.retry.retries = static_cast<unsigned>(number);
              return wrong;
          }},
