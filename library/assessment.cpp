@@ -37,7 +37,7 @@ pinwell_kind numberOf(Kind kind) {
     return PINWELL_KIND_PACKAGE;
 }
 
-/// While it lives, threads that this one starts get no signals: those are the host's to handle.
+/// While it lives, threads that this one starts get no signals: the host handles them.
 class SignalsBlocked {
   public:
     SignalsBlocked() noexcept {
@@ -67,7 +67,7 @@ void flattenInto(verify::Section& section, std::uint32_t depth, std::vector<Plac
     for (verify::Section& part : section.sections) flattenInto(part, depth + 1, all);
 }
 
-/// One artefact on its way to a verdict. The gravest of several is the verdict of all.
+/// One artefact on its way to a verdict. The verdict is the gravest of all findings.
 class Assessor {
   public:
     Assessor(const std::string& path, Depth depth, const ticket::TrustedRoots& roots,
@@ -114,7 +114,7 @@ class Assessor {
     }
 
     void readHashAndTicket() {
-        // The tool goes no further with such a file, which has no hash and no ticket to it.
+        // The tool stops here: such a file has no hash and no ticket.
         if (file_->appropriateExitCode() != kExitOK) return;
         found_.codeHash = file_->cdHash();
         if (found_.codeHash) {
@@ -129,7 +129,7 @@ class Assessor {
         checks_.cannotRead(verify::kSignature, {}, "there is no valid signature");
     }
 
-    // As the tool: without a hash it asks for no ticket.
+    // As in the tool: without a hash, the ticket is not read.
     void judgeTicketAlone() {
         readHashAndTicket();
         if (!found_.codeHash) return withoutSignature();
@@ -140,7 +140,7 @@ class Assessor {
         readHashAndTicket();
         const bool isAcceptable = found_.ticket && judgeTicket();
         verify::Report report = verifyWithThreads({kind_, url_.path()}, settings_.threads);
-        // The tool has found the hash, and these checks the code: of two openings of one path.
+        // The tool found the hash, these checks found the code: each opened the path by itself.
         if (!verify::checkOneArtefact(report.code, found_.codeHash, checks_))
             atLeast(PINWELL_VERDICT_ALTERED, "It changed while it was read.");
         if (!report.code.isSigned && !found_.codeHash && !found_.ticket) return withoutSignature();

@@ -22,7 +22,7 @@ struct Settings {
     unsigned threads = 0;             // 0: the processors that the process may use
 };
 
-/// A check, and how deep the part is that it belongs to.
+/// A check, and the depth of its part in the artefact.
 struct PlacedCheck {
     verify::Check check;
     std::uint32_t depth = 0;
@@ -43,14 +43,14 @@ struct Assessment {
 Assessment assess(const std::string& path, Depth depth, const ticket::TrustedRoots& roots,
                   const Settings& settings);
 
-/// A ticket, and the file that it is in.
+/// A ticket and its file.
 struct LocatedTicket {
     foundation::Data bytes;
     std::string file;
     std::uint64_t offset = 0;
 };
 
-/// Throws Failure if there is none that can be read.
+/// Throws Failure if there is no readable ticket.
 LocatedTicket findTicket(const std::string& path);
 
 /// Throws Failure if the artefact has no valid signature.

@@ -14,13 +14,14 @@ namespace pinwell::library {
 
 namespace {
 
-// The tool's message functions have nobody to talk to in another program. Set while the library is loaded.
+// Silences the tool's message functions, which must not print in another program. Set while the library is
+// loaded.
 [[maybe_unused]] const bool isSilent = [] {
     verboseLevel = kVerbosityQuiet;
     return true;
 }();
 
-/// As much of a text as there is room for, cut between characters.
+/// The part of a text that fits, cut between characters.
 std::string_view cut(std::string_view text, std::size_t room) {
     if (text.size() <= room) return text;
     const auto isContinuation = [](char c) { return (static_cast<unsigned char>(c) & 0xC0U) == 0x80U; };
@@ -41,11 +42,11 @@ void fill(pinwell_error& error, pinwell_status status, int systemError, std::uin
 }  // namespace
 
 std::uintptr_t nextHandleNumber() noexcept {
-    // Above the addresses that some languages' runtimes refuse to see in a pointer.
+    // Above the addresses that some languages' runtimes refuse in a pointer.
     static std::atomic<std::uintptr_t> last{0x1'0001};
     while (true) {
         const std::uintptr_t number = last.fetch_add(2);
-        if (number >= 0x1'0001) return number;  // else they have been gone through: 2^31 of them with 32 bits
+        if (number >= 0x1'0001) return number;  // else all are used: 2^31 of them with 32 bits
     }
 }
 

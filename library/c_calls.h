@@ -1,4 +1,4 @@
-// The boundary of the C interface: what comes in is checked, and nothing but a status goes out. For this
+// The boundary of the C interface: checks every argument, and lets no exception out, only a status. For this
 // folder only.
 #pragma once
 
@@ -12,7 +12,7 @@
 
 namespace pinwell::library {
 
-/// While it lives, the calling thread cannot be cancelled: that would unwind through a function of C.
+/// While it lives, the calling thread cannot be cancelled: cancellation would unwind through a C function.
 class Uncancelled {
   public:
     Uncancelled() noexcept;
@@ -24,18 +24,18 @@ class Uncancelled {
     int before_ = 0;
 };
 
-/// Fills `error` in, if there is one, and returns the failure's status.
+/// Fills in `error`, unless it is null, and returns the failure's status.
 pinwell_status report(const Failure& failure, pinwell_error* error) noexcept;
 pinwell_status reportOutOfMemory(pinwell_error* error) noexcept;
 pinwell_status reportInternal(const char* what, pinwell_error* error) noexcept;
 
-/// Whether a structure of the caller's is one that this library knows: at least as long as it was first.
+/// Whether a structure of the caller is long enough: at least as long as in the first version.
 template <class Structure>
 bool hasKnownSize(const Structure* structure) noexcept {
     return structure == nullptr || structure->struct_size >= sizeof(Structure);
 }
 
-/// Calls `work`, and turns what it throws into a status.
+/// Calls `work`, and turns its exceptions into a status.
 template <class Work>
 pinwell_status guarded(pinwell_error* error, Work work) noexcept {
     const Uncancelled uncancelled;
@@ -54,16 +54,16 @@ pinwell_status guarded(pinwell_error* error, Work work) noexcept {
     }
 }
 
-/// A path of the caller's, as text. Throws Failure if there is none, or a zero byte is in it.
+/// The caller's path as text. Throws Failure if it is null or contains a zero byte.
 std::string pathFrom(const char* path, std::size_t length);
 
-/// Leaves no handle in a place that the caller may look at after a failure.
+/// Sets the caller's handle to null, so that it is null after a failure.
 template <class Handle>
 void empty(Handle** place) noexcept {
     if (place != nullptr) *place = nullptr;
 }
 
-/// Throws Failure if a pointer that has to be there is null.
+/// Throws Failure if a required pointer is null.
 inline void require(const void* pointer, const char* problem) {
     if (pointer == nullptr) throw invalid(problem);
 }
@@ -75,7 +75,7 @@ auto handOut(const Range& range, std::size_t* length) noexcept {
     return range.data();
 }
 
-/// What is handed out from a handle that is none.
+/// The result for an invalid handle: null, with length 0.
 template <class Type = char>
 const Type* nothing(std::size_t* length) noexcept {
     if (length != nullptr) *length = 0;

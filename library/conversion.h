@@ -1,4 +1,4 @@
-// From what the parsers say to what the interface says. For this folder only.
+// Converts the parsers' results to the interface's types. For this folder only.
 #pragma once
 
 #include <string>
@@ -22,7 +22,7 @@ inline Error unreadable(const foundation::Error& error) {
             error.localizedFailureReason()};
 }
 
-/// Where `part` begins in `whole`, which it lies in.
+/// The offset of `part` in `whole`, which contains it.
 inline std::uint64_t offsetIn(ByteView whole, const std::byte* part) {
     return static_cast<std::uint64_t>(part - whole.data());
 }

@@ -1,4 +1,4 @@
-// A ticket taken apart, by the surveys that the tool decodes with.
+// Decodes a ticket with the surveys of the tool.
 #include <utility>
 
 #include "library/conversion.h"

@@ -1,4 +1,4 @@
-// Why a call of the C interface failed, on its way out. For this folder only.
+// The exception for a failed call of the C interface. For this folder only.
 #pragma once
 
 #include <cstdint>
@@ -23,14 +23,14 @@ inline Failure invalid(std::string message) {
     return {PINWELL_ERROR_ARGUMENT, std::move(message)};
 }
 
-/// What the C++ interface says of a file.
+/// Converts an error of the C++ interface about a file.
 inline Failure failureOf(const ticket::Error& error) {
     const bool isMalformed = error.code == ticket::ErrorCode::malformed;
     return {isMalformed ? PINWELL_ERROR_MALFORMED : PINWELL_ERROR_UNREADABLE, error.message,
             error.systemError, error.offset};
 }
 
-/// What the services say of a file.
+/// Converts an error of the services about a file.
 inline Failure failureOf(const foundation::Error& error) {
     const std::string& reason = error.localizedFailureReason();
     return {PINWELL_ERROR_UNREADABLE, reason.empty() ? error.localizedDescription() : reason,

@@ -1,4 +1,4 @@
-// Finding a ticket in a disk image and in a flat package, by the steps that the tool takes.
+// Finds a ticket in a disk image and in a flat package, by the steps of the tool.
 #include <utility>
 
 #include "files/file_reader.h"
@@ -20,7 +20,7 @@ using Opened = foundation::Result<std::unique_ptr<FileReader>>;
 /// The parsers' own messages, which name the file, are for the tool's verbose mode.
 constexpr const char* kNoName = "";
 
-/// A ticket is handed out whole or not at all.
+/// A ticket is returned whole or not at all.
 constexpr const char* kTooLong = "the ticket is too long to be read";
 bool isTooLong(std::uint64_t length) {
     return heldOfTicket(length) != length;
@@ -60,7 +60,8 @@ Result<FlatPackage> flatPackageIn(FileReader& file) {
     FlatPackage package;
     package_trailers read =
         walkPackageTrailers(file, kNoName, [&](std::uint64_t recordOffset, const trailer_header& record) {
-            // A length that leads out of the file ends the walk with a fault, and this is not handed out.
+            // A length that leads out of the file ends the walk with a fault; then this value is not
+            // returned.
             const std::uint64_t length = record.length();
             package.trailers.push_back({record.type(), recordOffset, {recordOffset - length, length}});
         });

@@ -1,7 +1,7 @@
 // Objects that programs in C hold by a number that looks like a pointer. For this folder only.
 //
-// The number is never an address, and never used again: whatever a program does with a handle that it has
-// freed, or with one of another type, is found out here. It is odd, as no address of an object is.
+// The number is never an address, and never used again. So the use of a freed handle, or of a handle of
+// another type, is detected here. The number is odd; no address of an object is.
 #pragma once
 
 #include <cstdint>
@@ -12,14 +12,14 @@
 
 namespace pinwell::library {
 
-/// A number that no handle has had, of whatever type.
+/// A number that no handle of any type has had.
 std::uintptr_t nextHandleNumber() noexcept;
 
 /// All live objects of one type. From any thread.
 template <class Handle, class Object>
 class HandleTable {
   public:
-    /// One a type, which is never destroyed: threads may still call while the process ends.
+    /// One table for each type. It is never destroyed: threads may still call while the process ends.
     static HandleTable& shared() {
         static HandleTable* const table = new HandleTable;  // NOLINT(*-owning-memory)
         return *table;

@@ -11,7 +11,7 @@ namespace pinwell::library {
 
 namespace {
 
-// What artefacts are looked at with asks for none of these; a program that has us loaded would not want it.
+// Reading an artefact uses none of these services, and a host program would not want them.
 
 [[noreturn]] void refuse(const char* what) {
     throw std::logic_error(what);
@@ -29,7 +29,7 @@ class NoDefaults final : public defaults::UserDefaultsService {
     }
 };
 
-/// What the tool writes there is part of the verdict here.
+/// The verdict contains what the tool would log.
 class NoLog final : public syslog::SystemLog {
     void error(std::string_view) override {}
 };

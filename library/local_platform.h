@@ -1,5 +1,5 @@
-// The platform as it is inside another program: files, types, code signatures and trust, and nothing that
-// speaks to anybody. For this folder only.
+// The platform inside another program: files, types, code signatures and trust, without network, log or user
+// defaults. For this folder only.
 #pragma once
 
 #include <cstdint>
@@ -10,7 +10,7 @@
 
 namespace pinwell::library {
 
-/// Owns its services; must outlive what was given services(). For one call, and one thread.
+/// Owns its services; must outlive every user of services(). For one call, and one thread.
 class LocalPlatform {
   public:
     /// `roots` null: nothing is trusted.

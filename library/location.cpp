@@ -1,4 +1,4 @@
-// Where an artefact's ticket is, and what its record is called.
+// The place of an artefact's ticket, and the name of its record.
 #include <utility>
 
 #include "library/assessment.h"
@@ -17,7 +17,7 @@ namespace {
 
 const char* const kNoTicket = "no ticket is attached";
 
-/// The artefact, or why it cannot be opened.
+/// The artefact, or the reason why it cannot be opened.
 verify::OpenedArtefact opened(const URL& url, const Platform& platform) {
     if (const auto properties = platform.files.resourceProperties(url); !properties)
         throw failureOf(properties.error());

@@ -1,4 +1,4 @@
-// What TrustedRoots holds. For this folder only.
+// The contents of TrustedRoots. For this folder only.
 #pragma once
 
 #include "pinwell/ticket.h"

@@ -1,4 +1,4 @@
-// The C interface: what <pinwell/ticket_c.h> declares, over the parts of this folder.
+// The C interface of <pinwell/ticket_c.h>, on the parts of this folder.
 #include "pinwell/ticket_c.h"
 
 #include <cstring>
@@ -50,7 +50,7 @@ pinwell_status assessFile(const char* path, std::size_t length, Depth depth, con
     });
 }
 
-/// Copies a name out, or says how long it is.
+/// Copies a name to the caller's buffer, or reports its length.
 void copyOut(const std::string& name, char* buffer, std::size_t size, std::size_t* length) {
     if (length != nullptr) *length = name.size();
     if (buffer == nullptr && size != 0) throw invalid("there is no buffer");

@@ -1,5 +1,5 @@
-// Judging a ticket. satchel_get_validated_tm_ticket decides, as it does for the tool; what it refuses is gone
-// through once more, step by step, to find out why.
+// Judges a ticket. satchel_get_validated_tm_ticket decides, as in the tool. A refused ticket is checked
+// again, step by step, to find the reason.
 #include <algorithm>
 #include <utility>
 
@@ -26,13 +26,13 @@ static_assert(kVerdictRecoverableFailure == numberOf(trust::Verdict::recoverable
 static_assert(kVerdictFatalFailure == numberOf(trust::Verdict::fatalFailure));
 static_assert(kVerdictOtherError == numberOf(trust::Verdict::otherError));
 
-/// Finds out why a ticket is refused. The steps are those of satchel_verify_signature, and in their order.
+/// Finds the reason for a refusal. Takes the steps of satchel_verify_signature, in the same order.
 class Explanation {
   public:
     Explanation(ByteView ticket, trust::TrustService& service) : ticket_(ticket), service_(service) {}
 
     Validation run() && {
-        // Each answers false once it has found the reason.
+        // Each returns false if it has found the reason.
         const bool isSound =
             readFrame() && readCertificates() && judgeChain() && checkSignature() && readPayload();
         if (isSound) refuse(Step::memory, 0, "there is not enough memory to judge the ticket");
@@ -86,7 +86,7 @@ class Explanation {
         return refuse(Step::chain, offsetAtFault(reason).value_or(block), reason);
     }
 
-    // The place of the certificate that the description is about, when it is one of the ticket's.
+    // The offset of the certificate in the description; `nullopt` if it is not one of the ticket's.
     std::optional<std::uint64_t> offsetAtFault(const std::string& description) const {
         for (const foundation::Value& link : trust_->copyProperties()) {
             const std::string* const title = link[trust::kPropertyTitle].string();
