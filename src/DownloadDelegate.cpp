@@ -8,7 +8,7 @@
 namespace pinwell {
 namespace {
 
-// Hands the error of the last step to a caller that wants it.
+// Passes the error of the last step to the caller, if it is wanted.
 void handOut(ErrorOut error, std::optional<Error> value) {
     if (error != nullptr) *error = std::move(value);
 }
@@ -78,7 +78,7 @@ void DownloadDelegate::writeDownloadedData(const std::optional<Data>& data, Erro
 
 void DownloadDelegate::notifyResult() {
     if (operation_ == kOperationStaple && hashedFile_->appropriateExitCode() == kExitOK) {
-        // From the disk, by a new object: the old one's caches describe the file as it was.
+        // Read from the disk by a new object: the old one's caches describe the file before the write.
         const URL url = *hashedFile_->fileURL();
         const auto fresh = PWHashedFile::initWithFileURL(url, platform_);
         if (fresh != nullptr) setHashedFile(fresh);

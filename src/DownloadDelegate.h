@@ -2,8 +2,8 @@
 //
 // Made once by runOperation and kept for the whole run. grabTicket runs on the main thread; the callbacks run
 // on the serial queue of the session they belong to, one at a time, while the main thread waits. Every run
-// that gets as far as the network ends in notifyResult, all but one: a large download that fails leaves the
-// process waiting.
+// that reaches the network ends in notifyResult, with one exception: after a failed large download the
+// process waits.
 #pragma once
 
 #include <cstdint>
@@ -23,7 +23,7 @@ inline constexpr std::uint8_t kOperationStaple = 1;
 inline constexpr std::uint8_t kOperationValidate = 2;
 
 /// Judges the server of a challenge by the two server policies, one after the other, and completes the
-/// challenge. Prints what speaks against a server.
+/// challenge. Prints why a server is refused.
 void answerServerChallenge(const https::AuthenticationChallenge& challenge,
                            const https::ChallengeCompletion& completion);
 
@@ -31,11 +31,11 @@ class DownloadDelegate : public https::SessionDelegate {
   public:
     DownloadDelegate(std::shared_ptr<PWHashedFile> hashedFile, const Platform& platform);
 
-    /// Only the test for staple is ever made: every other value behaves as validate.
+    /// Only compared with staple: every other value means validate.
     std::uint8_t operation() const noexcept { return operation_; }
     void setOperation(std::uint8_t operation) noexcept { operation_ = operation; }
 
-    /// Declared for the interface's sake; they have no effect.
+    /// Part of the interface; they have no effect.
     bool dryrun() const noexcept { return dryrun_; }
     void setDryrun(bool dryrun) noexcept { dryrun_ = dryrun; }
     bool force() const noexcept { return force_; }
@@ -45,11 +45,11 @@ class DownloadDelegate : public https::SessionDelegate {
     const std::shared_ptr<PWHashedFile>& hashedFile() const noexcept { return hashedFile_; }
     void setHashedFile(std::shared_ptr<PWHashedFile> file) { hashedFile_ = std::move(file); }
 
-    /// Where a downloaded ticket is kept.
+    /// The file of the downloaded ticket.
     const std::optional<URL>& tempFileURL() const noexcept { return tempFileURL_; }
     void setTempFileURL(std::optional<URL> url) { tempFileURL_ = std::move(url); }
 
-    /// The announced size of a large ticket; nil until the response names one, and whatever it names.
+    /// The announced size of a large ticket, as in the response; nil before it.
     const foundation::Value& largeTicketSize() const noexcept { return largeTicketSize_; }
     void setLargeTicketSize(foundation::Value size) { largeTicketSize_ = std::move(size); }
 
@@ -58,8 +58,8 @@ class DownloadDelegate : public https::SessionDelegate {
 
     // Lookup.
 
-    /// True when asynchronous work has started that will end the process; false when the caller ends it with
-    /// the hashed file's exit code, or 1 when that is 0.
+    /// Returns true if asynchronous work has started that will end the process. If false, the caller ends it
+    /// with the hashed file's exit code, or 1 if that is 0.
     bool grabTicket();
 
     /// The lookup's completion handler.
@@ -69,7 +69,7 @@ class DownloadDelegate : public https::SessionDelegate {
 
     // Large tickets.
 
-    /// True when the download is running.
+    /// Returns true if the download is running.
     bool asynchronouslyDownloadLargeTicketFromURLString(const std::string& urlTemplate);
 
     void didFinishDownloading(https::Session& session, https::Task& task, const URL& location) override;
@@ -82,19 +82,19 @@ class DownloadDelegate : public https::SessionDelegate {
 
     // Acceptance and report.
 
-    /// Whether the ticket is genuine, not revoked, and lists the file's cdhash. Records the exit code, prints
+    /// Whether the ticket is genuine, not revoked, and lists the file's cdhash. Records the exit code; prints
     /// nothing.
     bool isValidTicketData(const std::optional<Data>& data);
     bool isExistingTicketValid();
 
-    /// Keeps the ticket in the temporary directory, judges it, and staples it when that is the operation. The
+    /// Keeps the ticket in the temporary directory, judges it, and staples it if the operation is staple. The
     /// outcome is the exit code on the hashed file; `error` receives the last step's error.
     void writeDownloadedData(const std::optional<Data>& data, ErrorOut error);
 
-    /// "2/0a1b...": how messages name the file's hash.
+    /// The file's hash in messages: "2/0a1b...".
     std::string prettyHashString();
 
-    /// Checks what was written, prints the outcome and ends the process.
+    /// Checks the written ticket, prints the outcome and ends the process.
     void notifyResult();
 
   private:

@@ -1,4 +1,4 @@
-// Tickets too large to stand in their record: fetched as a file of their own.
+// Tickets too large for their record: downloaded as a separate file.
 
 #include "foundation/byte_count.h"
 #include "src/DownloadDelegate.h"
@@ -26,7 +26,7 @@ bool DownloadDelegate::asynchronouslyDownloadLargeTicketFromURLString(const std:
 void DownloadDelegate::didFinishDownloading(https::Session&, https::Task& task, const URL& location) {
     const auto data = platform_.files.contentsOfFile(location).asOptional();
     const std::size_t length = data ? data->size() : 0;
-    // Whatever size was announced, and although the stapled ticket has recorded 0: this one was not seen.
+    // For any announced size, and although the stapled ticket recorded 0: this ticket was not checked.
     if (!data) hashedFile_->setAppropriateExitCode(kExitDataError);
     const auto response = task.response();
     switch (faultOfAsset(largeTicketSize_, length, response)) {
@@ -54,7 +54,7 @@ void DownloadDelegate::didComplete(https::Session&, https::Task&, const std::opt
     MessageLog("Large ticket for %@ failed to download. %@", hashedFile_->fileURL()->path(),
                error->localizedFailureReason());
     hashedFile_->setAppropriateExitCode(kExitNoHost);
-    // The run is parked from here on, and nothing will be written: others need not wait for it.
+    // The run only waits from here on, and writes nothing: other processes need not wait for it.
     lock_.reset();
 }
 

@@ -1,4 +1,4 @@
-// The lookup of the ticket's record: one POST to the record service, and what its answer means.
+// The lookup of the ticket's record: one POST to the record service, and reading its response.
 
 #include <stdexcept>
 
@@ -46,7 +46,7 @@ bool DownloadDelegate::grabTicket() {
     NoisyLog(" Headers: %@", headers);
 
     if (!url) {
-        // Without a host there is nothing to connect to: the lookup has failed before it began.
+        // Without a host there is nothing to connect to: the lookup fails before it begins.
         lookupDidComplete(std::nullopt, std::nullopt, url.error());
         return true;
     }
@@ -106,7 +106,7 @@ void DownloadDelegate::lookupDidComplete(const std::optional<Data>& data,
     notifyResult();
 }
 
-// Throws if the response does not have the shape that is expected of it.
+// Throws if the response does not have the expected shape.
 std::optional<Data> DownloadDelegate::ticketFromResponse(const Value& response, bool& downloading) {
     const TicketRecord record = ticketRecordOf(response);
     setLargeTicketSize(record.assetSize);

@@ -1,5 +1,5 @@
-// Which servers may answer: one that satisfies either of the two server policies for the host being
-// contacted.
+// Accepts a server that satisfies either of the two server policies for the contacted
+// host.
 
 #include <vector>
 

@@ -13,8 +13,8 @@ foundation::Dictionary basicCodeProperties(const foundation::URL& fileURL, const
         return {};
     }
 
-    // The executable's pages and the sealed resources are not this tool's to judge: the ticket vouches for
-    // the hash.
+    // This tool does not judge the executable's pages and the sealed resources: the ticket vouches for the
+    // hash.
     status = platform.codeSigning.checkValidity(
         *code, codesign::kDoNotValidateExecutable | codesign::kDoNotValidateResources);
     if (status != codesign::kSuccess) return {};

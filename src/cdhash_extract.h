@@ -7,7 +7,7 @@
 
 namespace pinwell {
 
-/// Keys of the properties. All but the first are there only when the signature has them.
+/// Keys of the properties. All except the first exist only if the signature has them.
 inline constexpr std::string_view kCDHashKey = "cdhash";                    // byte buffer
 inline constexpr std::string_view kDigestAlgorithmKey = "digestAlgorithm";  // number: digest type
 inline constexpr std::string_view kTeamIdKey = "teamId";                    // text
@@ -15,9 +15,9 @@ inline constexpr std::string_view kSecureTimestampKey = "secureTimestamp";  // t
 inline constexpr std::string_view kSigningIdKey = "signingId";              // text
 inline constexpr std::string_view kFlagsKey = "flags";                      // number
 
-/// The properties of the code at `fileURL`; empty on any failure. An invalid or missing signature is silent;
-/// what the code-signing service itself fails at goes to the system log. Never prints, never changes an exit
-/// code.
+/// The properties of the code at `fileURL`; empty on any failure. An invalid or missing signature is not
+/// reported; a failure of the code-signing service itself goes to the system log. Never prints, never changes
+/// an exit code.
 foundation::Dictionary basicCodeProperties(const foundation::URL& fileURL, const Platform& platform);
 
 }  // namespace pinwell

@@ -10,8 +10,8 @@ std::vector<CodeHash> listableHashes(const CodeHash& own, const std::vector<Code
     std::vector<CodeHash> hashes{own};
     std::set<CodeHash> listed{own};
     for (const CodeHash& hash : found) {
-        // Digest types that tickets do not know (a later platform's) leave the artefact's other hashes
-        // usable. A ticket over a hash of unknown digest type lists such hashes alone.
+        // If a digest type is unknown to tickets (from a later platform), the artefact's other hashes stay
+        // usable. If the own hash has an unknown digest type, the ticket lists only such hashes.
         const std::size_t length = tm_cdhash_algorithm_get_size(hash.algorithm);
         const bool listable =
             length != 0 && hash.hash.size() == length && (hash.algorithm == 0) == (own.algorithm == 0);

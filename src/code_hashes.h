@@ -11,8 +11,8 @@
 
 namespace pinwell {
 
-/// A code directory's hash with the number of its digest type (codesign::DigestType). Number 0 stands for a
-/// hash whose digest type is not known; it has 20 bytes.
+/// A code directory's hash with the number of its digest type (codesign::DigestType). Number 0 means an
+/// unknown digest type; the hash then has 20 bytes.
 struct CodeHash {
     std::uint32_t algorithm = 0;
     foundation::Data hash;
@@ -20,12 +20,12 @@ struct CodeHash {
     auto operator<=>(const CodeHash&) const = default;
 };
 
-/// Joins an artefact's own hash with whatever else was found in it: the own one first, no duplicates, and
-/// nothing that a ticket with this own hash could not list.
+/// Joins an artefact's own hash with the other hashes found in it: its own first, without duplicates. Leaves
+/// out hashes that a ticket with this own hash cannot list.
 std::vector<CodeHash> listableHashes(const CodeHash& own, const std::vector<CodeHash>& found);
 
 /// The same with the hashes of all slices and of nested code of the artefact at this path. An unsigned disk
-/// image or a package has none beside its own. Reads files; blocks.
+/// image or a package has only its own. Reads files; blocks.
 std::vector<CodeHash> listableHashes(const CodeHash& own, const foundation::URL& artefact,
                                      codesign::CodeSigningService& codeSigning);
 

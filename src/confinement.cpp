@@ -21,18 +21,18 @@ using foundation::URL;
 using sandbox::Access;
 using sandbox::FileRules;
 
-// What is read of a bundle (its executable's signature, property lists, the ticket) is known only when it has
-// been read; an executable of this size has a signature of 5 MiB.
+// How much of a bundle is read (its executable's signature, property lists, the ticket) is not known before.
+// An executable of this size has a signature of 5 MiB.
 constexpr std::uint64_t kReadOfABundle = std::uint64_t{512} * 1024 * 1024;
 
-// Of the path itself: what a link in the last component leads to is not read.
+// Of the path itself: a link in the last component is not followed.
 std::optional<struct stat> statusOf(const std::string& path) {
     struct stat status {};
     if (lstat(path.c_str(), &status) != 0) return std::nullopt;
     return status;
 }
 
-// A file is replaced by another one, which is made beside it, and other programs may do that at any time.
+// A file is replaced by a new one made beside it, and other programs may do that at any time.
 void addArtefact(FileRules& rules, const URL& artefact, Access access) {
     const auto status = statusOf(artefact.path());
     if (!status || S_ISLNK(status->st_mode)) return;
@@ -47,7 +47,7 @@ FileRules commonFiles(const foundation::PlatformDirectory& platform) {
     return rules;
 }
 
-// Of a program that asks the record service.
+// The rights of a program that asks the record service.
 sandbox::Confinement withNetwork(const foundation::PlatformDirectory& platform) {
     sandbox::Confinement confinement;
     confinement.network = sandbox::Network::connect;
@@ -85,7 +85,7 @@ sandbox::Confinement confinementOfReading(const std::vector<std::string>& artefa
     sandbox::Confinement confinement;
     confinement.calls = sandbox::Calls::reading;
     confinement.files = commonFiles(platform);
-    // By the paths that are opened: without a slash at the end, for one.
+    // With the paths as opened, for example without a slash at the end.
     for (const std::string& path : artefacts)
         confinement.files.push_back({URL::fileURLWithPath(path).path(), Access::read});
     return confinement;

@@ -1,4 +1,4 @@
-// The rights that a program keeps while it reads artefacts, and the end that it takes when it runs away.
+// The rights that a program keeps while it reads artefacts, and its end if it exceeds its limits.
 #pragma once
 
 #include <cstdint>
@@ -11,29 +11,29 @@
 
 namespace pinwell {
 
-/// What the tool needs for that operation on that artefact: to validate, it reads a bundle, or the directory
-/// that a file is in; to staple, it writes there. It writes to the temporary directory, and reads the
-/// platform directory, the user's defaults, the libraries and what name resolution and file types need.
+/// The rights of the tool for that operation on that artefact. To validate, it reads a bundle, or the
+/// directory of a file; to staple, it writes there. It writes to the temporary directory, and reads the
+/// platform directory, the user's defaults, the libraries and the files for name resolution and file types.
 sandbox::Confinement confinementOfRun(std::uint8_t operation, const foundation::URL& artefact,
                                       const foundation::PlatformDirectory& platform);
 
-/// The same for several artefacts that are known beforehand.
+/// The same for several artefacts, known beforehand.
 sandbox::Confinement confinementOfRuns(std::uint8_t operation, const std::vector<std::string>& artefacts,
                                        const foundation::PlatformDirectory& platform);
 
-/// What reading these artefacts needs, of a program without a network: nothing beside them.
+/// The rights of a program without a network to read these artefacts and nothing beside them.
 sandbox::Confinement confinementOfReading(const std::vector<std::string>& artefacts,
                                           const foundation::PlatformDirectory& platform);
 
-/// Has the process look for the platform security library, whose own files nobody knows, and keeps it.
-/// For a program that judges tickets, before it gives up its rights.
+/// Loads the platform security library if it exists, and keeps it: its own files are unknown. For a program
+/// that judges tickets, before it gives up its rights.
 void keepSecurityLibrary();
 
-/// Processor time, in seconds, that a run may take over that artefact.
+/// The limit of processor time, in seconds, for a run over that artefact.
 std::uint64_t processorSecondsForArtefact(const foundation::URL& artefact);
 
-/// Limits processor time and stack of a run of the tool. Beyond them it says so to the user and ends with the
-/// failure that it has recorded last (PWHashedFile).
+/// Limits processor time and stack of a run of the tool. A run beyond the limits tells the user and ends with
+/// the failure recorded last (PWHashedFile).
 void limitRun(const foundation::URL& artefact);
 
 }  // namespace pinwell

@@ -1,4 +1,4 @@
-// The services of this machine, made once and tied together: what main and the companions run on.
+// The services of this machine, made once and connected, for main and the companions.
 #pragma once
 
 #include <functional>
@@ -8,11 +8,11 @@
 
 namespace pinwell {
 
-/// Owns every service; must outlive whatever was given its services(). Making it reads nothing but the
+/// Owns every service; must outlive every user of its services(). The constructor reads only the
 /// environment.
 class HostPlatform {
   public:
-    /// Whether a session keeps its connection from one exchange to the next, or has a new one for each.
+    /// Whether a session keeps its connection for the next exchange, or makes a new one for each.
     enum class Connections : bool { closed, kept };
 
     /// `exitProcess` ends the process with a status.

@@ -23,7 +23,7 @@ namespace {
 
 using namespace pinwell;
 
-// The operation of the run, and the long options; process-wide, as the option scan is.
+// The operation of the run, and the long options; process-wide, like the option scan.
 std::uint8_t operation = kOperationNone;
 
 constexpr option options[] = {
@@ -46,13 +46,13 @@ void printUsage() {
         "Supported file formats are: UDIF disk images, code-signed executable\n"
         "bundles, and signed \"flat\" installer packages.\n",
         program, program);
-    // A standard error that is closed loses the text and nothing else.
+    // If standard error is closed, only the text is lost.
     [[maybe_unused]] const ssize_t written = ::write(STDERR_FILENO, usage.data(), usage.size());
 }
 
 void scanOptions(int argc, char** argv) {
-    unsetenv("POSIXLY_CORRECT");  // with it, the scan would stop at the command word
-    opterr = 0;                   // the usage text says it all
+    unsetenv("POSIXLY_CORRECT");  // otherwise the scan would stop at the command word
+    opterr = 0;                   // the usage text is enough
     for (int found = 0; (found = getopt_long(argc, argv, "qv", options, nullptr)) != -1;) {
         switch (found) {
             case 'q':
@@ -79,19 +79,19 @@ std::uint8_t operationForCommand(std::string_view command) {
 }  // namespace
 
 int main(int argc, char** argv) {
-    // The threads of a run take turns: a second heap would only be more fresh memory to fault in.
+    // The threads of a run take turns: a second heap would only cost more new memory.
     mallopt(M_ARENA_MAX, 1);
     foundation::occupyStandardStreams();
-    // A reader that has gone away must not stop a staple half-way.
+    // A closed pipe must not stop a staple half-way.
     std::signal(SIGPIPE, SIG_IGN);
-    // The same for a file that would grow beyond the caller's limit: the write then fails, and says so.
+    // The same for a file that would exceed the caller's limit: the write then fails with an error.
     std::signal(SIGXFSZ, SIG_IGN);
 
     if (argc <= 2) {
         printUsage();
         return kExitUsage;
     }
-    // As passed: the option scan moves the arguments about.
+    // Saved first: the option scan reorders the arguments.
     const std::string command = argv[1];
     const std::string path = argv[argc - 1];
     scanOptions(argc, argv);

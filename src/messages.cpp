@@ -15,8 +15,8 @@ namespace {
 
 thread_local const MessageReceiver* receiverOfThread = nullptr;
 
-// Whoever shares the pipe may have made it non-blocking; a reader that lags is waited for all the same. False
-// when there is nothing to wait for.
+// Another user of the pipe may have made it non-blocking; a slow reader is still waited for. Returns false if
+// there is nothing to wait for.
 bool waitForReader() {
     pollfd output{STDOUT_FILENO, POLLOUT, 0};
     const int ready = ::poll(&output, 1, -1);
@@ -46,7 +46,7 @@ void writeMessageLine(std::string line) {
     while (!rest.empty()) {
         const ssize_t written = ::write(STDOUT_FILENO, rest.data(), rest.size());
         if (written < 0 && (errno == EINTR || (errno == EAGAIN && waitForReader()))) continue;
-        if (written <= 0) return;  // a message is never worth a staple
+        if (written <= 0) return;  // a lost message must not stop a staple
         rest.remove_prefix(static_cast<std::size_t>(written));
     }
 }

@@ -1,7 +1,7 @@
 // The two message functions, and the setting that gates them.
 //
 // Each call is one line on standard output, in one write, without a prefix. A format that ends in a newline
-// gives an empty line after it. A standard output that is closed or full loses the line and nothing else.
+// gives an empty line after it. If standard output is closed or full, only the line is lost.
 #pragma once
 
 #include <cstdint>
@@ -23,7 +23,7 @@ extern std::uint8_t verboseLevel;
 using MessageReceiver = std::function<void(std::string line)>;
 
 /// While it lives, the lines of the calling thread go to `receiver` and not to standard output. The receiver
-/// gets the user's lines even in quiet mode. A redirection inside another one replaces it until it ends.
+/// gets the user's lines even in quiet mode. An inner redirection replaces the outer one until it ends.
 class MessageRedirection {
   public:
     explicit MessageRedirection(MessageReceiver receiver);
@@ -39,7 +39,7 @@ class MessageRedirection {
 /// Whether the calling thread's lines are redirected.
 bool messagesAreRedirected() noexcept;
 
-/// Writes `line` and a newline to standard output, or hands it to the calling thread's receiver.
+/// Writes `line` and a newline to standard output, or passes it to the calling thread's receiver.
 void writeMessageLine(std::string line);
 
 /// A diagnostic line, shown in verbose mode only.

@@ -1,4 +1,4 @@
-// What version of the tool this is, for what(1) and for debuggers; nothing in a run prints it.
+// The version of the tool, for what(1) and for debuggers; no run prints it.
 #pragma once
 
 namespace pinwell {

@@ -1,4 +1,4 @@
-// The host platform as the tool sees it: one reference to each service, made once in main and passed down.
+// The host platform for the tool: one reference to each service, made once in main and passed down.
 #pragma once
 
 #include <functional>

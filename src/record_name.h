@@ -1,4 +1,4 @@
-// What a ticket's record is called.
+// The name of a ticket's record.
 #pragma once
 
 #include <cstdint>

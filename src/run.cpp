@@ -22,8 +22,8 @@ bool lockArtefact(const Platform& platform, const URL& path, std::unique_ptr<fil
 
 int runOperation(std::uint8_t operation, const URL& path, const Platform& platform,
                  const std::function<void()>& waitForEnd) {
-    // Taken before anything is read, and held to the end: of two staples of one artefact, the second begins
-    // to read when the first has read back what it wrote.
+    // Taken before anything is read, and held to the end. So a second staple of the artefact begins to read
+    // after the first has read back its ticket.
     std::unique_ptr<files::ItemLock> lock;
     const auto hashedFile = PWHashedFile::initWithFileURL(
         path, platform, [&] { return operation != kOperationStaple || lockArtefact(platform, path, lock); });

@@ -29,7 +29,7 @@ using foundation::Dictionary;
 using foundation::Error;
 using foundation::Value;
 
-// A caller's mistake rather than a file's fault: no buffer can lie there.
+// A caller's mistake, not a file's fault: no buffer can be there.
 bool wrapsAddressSpace(const std::byte* start, std::uint64_t length) {
     return length > std::numeric_limits<std::uintptr_t>::max() - std::bit_cast<std::uintptr_t>(start);
 }
@@ -46,8 +46,8 @@ std::optional<ticket_fault> findFault(ByteView container, const satchel_fields& 
     return std::nullopt;
 }
 
-// Where the certificate block ends when the lengths do not add up: they say so in two ways, and the block
-// itself in a third.
+// The end of the certificate block if the lengths do not add up. The two lengths give two results, and the
+// block itself a third.
 std::uint64_t certificatesLengthIn(ByteView parts, const satchel_fields& header) {
     const std::optional<der::Element> block = der::readElement(parts);
     const std::uint64_t stated = header.certificates_length;
@@ -80,7 +80,7 @@ void locateParts(ByteView container, satchel_survey& survey) {
                    .version = survey.header->version};
 }
 
-// An object that cannot be made is a refusal like any other here.
+// A failure to make an object is a refusal like any other here.
 template <class Step>
 trust::Status guardMemory(Step step) {
     try {
@@ -90,7 +90,7 @@ trust::Status guardMemory(Step step) {
     }
 }
 
-// The policy that the platform security library would have made, option by option.
+// The policy that the platform security library would make, option by option.
 trust::Status createLocalPolicy(trust::PolicyRef* policy) {
     Dictionary options;
     options.insert_or_assign(std::string(option::kCriticalExtensions), true);
@@ -262,7 +262,7 @@ trust::Status _satchel_create_cert_policy(trust::PolicyRef* policy, trust::Trust
         case trust::NamedPolicyOutcome::created:
             return *policy != nullptr ? status::kSuccess : status::kNoPolicy;
         case trust::NamedPolicyOutcome::refused:
-            // The platform has an opinion, and it is no: nothing of ours takes its place.
+            // The platform refused: our own policy must not replace its decision.
             policy->reset();
             return status::kNoPolicy;
         case trust::NamedPolicyOutcome::unavailable:
@@ -316,7 +316,7 @@ trust::Status _satchel_validate_signature(const trust::PublicKey& key, ByteView 
                                           ByteView signature, trust::TrustService& service) {
     const std::optional<Error> error = service.verifySignature(key, signed_data, signature);
     if (!error) return status::kSuccess;
-    // A code of another domain is no status; one that does not fit a status could be cut down to success.
+    // A code of another domain is not a status, and a code that does not fit could be truncated to success.
     const bool isStatus = error->domain() == foundation::kOSStatusErrorDomain && error->code() != 0 &&
                           std::in_range<trust::Status>(error->code());
     return isStatus ? static_cast<trust::Status>(error->code()) : status::kBadSignature;

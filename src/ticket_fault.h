@@ -1,4 +1,4 @@
-// What the functions of the ticket formats return, and the rule that explains a refusal.
+// The results of the ticket formats' functions, and the rule that explains a refusal.
 #pragma once
 
 #include <cstdint>
@@ -10,10 +10,11 @@ inline constexpr std::int32_t kAccepted = 0;
 inline constexpr std::int32_t kRefused = -1;
 
 struct ticket_fault {
-    /// From the start of the bytes that were looked at.
+    /// From the start of the examined bytes.
     std::uint64_t offset = 0;
 
-    /// What is wrong, one line without a full stop. Of static storage, so that refusing allocates nothing.
+    /// The broken rule, in one line without a full stop. In static storage, so that a refusal does not
+    /// allocate.
     const char* rule = "";
 
     bool operator==(const ticket_fault&) const = default;

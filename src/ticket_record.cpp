@@ -25,13 +25,13 @@ constexpr std::string_view kFileNameToken = "${f}";
 constexpr std::string_view kAssetFileName = "lmasset.ticket";
 
 URL lookupURLForHost(const std::string& host, std::string_view container, std::string_view environment) {
-    // The host was checked when it was read, so this is a URL whatever the container holds.
+    // The host was checked when it was read, so this is a valid URL with any container.
     return URL::fromString("https://" + host)
         ->appendingPathComponent(
             foundation::format("database/1/%@/%@/public/records/lookup", container, environment));
 }
 
-// A member that must be text if it is there.
+// A member that must be text if it exists.
 const std::string* textOrNil(const Value& value) {
     if (value.isNil()) return nullptr;
     if (value.string() == nullptr) throw foundation::ValueTypeError("a text was expected");

@@ -1,13 +1,13 @@
-// What the record service is asked, and how its answer is read: the protocol of a lookup, without a
-// connection.
+// The protocol of a lookup, without a connection: the request to the record service, and reading its
+// response.
 //
 //   POST https://HOST/database/1/CONTAINER/ENVIRONMENT/public/records/lookup    application/json
 //        {"records": [{"recordName": "2/2/..."}]}
-//     -> {"records": [RECORD]}, where of a RECORD is read:
+//     -> {"records": [RECORD]}, with these members of a RECORD:
 //        fields.signedTicket.value                     the ticket in base64
-//        fields.signedTicketAsset.value.downloadURL    where a large one is, with the token "${f}" in it
+//        fields.signedTicketAsset.value.downloadURL    the URL of a large ticket, with the token "${f}"
 //        fields.signedTicketAsset.value.size           its length in bytes
-//        reason                                        why there is none
+//        reason                                        why there is no ticket
 #pragma once
 
 #include <cstdint>
@@ -28,44 +28,44 @@ namespace pinwell {
 /// The response header that names a request.
 inline constexpr std::string_view kRequestIdentifierHeader = "X-Ostrel-Request-UUID";
 
-/// The domain of the user defaults that are read where internal security policies are allowed.
+/// The domain of the user defaults; read only if internal security policies are allowed.
 inline constexpr std::string_view kDefaultsDomain = "com.ostrel.tm.pinwell";
 
-/// Where records are looked up: the platform directory's host, and the container and environment of the user
-/// defaults where the build variant allows them. The error says what is wrong with platform.json.
+/// The URL of lookups: the platform directory's host, and the container and environment of the user defaults
+/// if the build variant allows them. The error names the fault of platform.json.
 foundation::Result<foundation::URL> lookupURL(const Platform& platform);
 
 /// The body of a lookup of these records, in their order.
 foundation::Value lookupBody(const std::vector<std::string>& recordNames);
 
-/// The POST that looks these records up. Without a URL, a request that does not start. `nullopt` if a name is
+/// The POST that looks these records up. Without a URL, the request does not start. `nullopt` if a name is
 /// not UTF-8.
 std::optional<https::Request> lookupRequest(std::optional<foundation::URL> url,
                                             const foundation::Value& body);
 
-/// The parts of a record that are read, each nil if the record does not have it.
+/// The members of a record that are read; nil if missing.
 struct TicketRecord {
     foundation::Value ticket;
-    foundation::Value assetURL;  // of no account where there is a ticket
+    foundation::Value assetURL;  // ignored if there is a ticket
     foundation::Value assetSize;
     foundation::Value reason;
 
-    /// The ticket in base64. Null if there is none. Throws foundation::ValueTypeError if it is no text.
+    /// The ticket in base64. Null if there is none. Throws foundation::ValueTypeError if it is not text.
     const std::string* ticketText() const;
 
     /// The template of the asset's URL. Null if there is none or it is empty. Throws as ticketText().
     const std::string* assetURLTemplate() const;
 };
 
-/// The first record of an answer. Throws foundation::ValueTypeError or std::out_of_range if the answer does
-/// not have the shape of one.
+/// The first record of an answer. Throws foundation::ValueTypeError or std::out_of_range if the answer has
+/// another shape.
 TicketRecord ticketRecordOf(const foundation::Value& answer);
 
-/// What speaks against a downloaded asset, looked at in this order.
+/// The faults of a downloaded asset, checked in this order.
 enum class AssetFault : std::uint8_t {
     none,
-    length,  // it is not as long as the record says; a record that says nothing says 0
-    status,  // the answer is another one than 200
+    length,  // not the length in the record; a missing length means 0
+    status,  // the status is not 200
 };
 AssetFault faultOfAsset(const foundation::Value& announcedSize, std::size_t length,
                         const std::optional<https::HTTPResponse>& response);

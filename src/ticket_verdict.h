@@ -1,4 +1,4 @@
-// Whether a ticket is good for a file: the one rule that stapling, validating and fetching go by.
+// Whether a ticket is good for a file: the one rule for stapling, validating and fetching.
 #pragma once
 
 #include <cstdint>
@@ -13,7 +13,7 @@ namespace pinwell {
 
 enum class TicketVerdict : std::uint8_t {
     acceptable,  // genuine, not revoked, and it lists the hash
-    revoked,     // genuine, and it marks the software as revoked, whatever it lists
+    revoked,     // genuine, and marks the software as revoked, with any list of hashes
     refused,     // anything else
 };
 

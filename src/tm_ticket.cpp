@@ -1,5 +1,5 @@
-// The ticket object is one block of bytes, as long as its payload. Integers are kept little-endian, as they
-// came.
+// The ticket object is one block of bytes, as long as its payload. Integers stay
+// little-endian.
 //
 //   Offset  Size           Field
 //   0       2              version
@@ -10,10 +10,10 @@
 //   20      n x entrySize  entries, as in the payload
 //   end-4   4              zero
 //
-// A struct with the entries behind it would need a flexible array member, which C++ has not, or arithmetic on
-// a pointer beyond the object it points to, which it does not define. So the block is an array of single
-// bytes of the type tm_ticket, a ticket is the address of its first element, and the fields are read through
-// the same bounds-checked cursor as input.
+// A struct followed by the entries would need a flexible array member, which C++ does not have, or pointer
+// arithmetic beyond an object, which is undefined. So the block is an array of single bytes of the type
+// tm_ticket, and a ticket is the address of its first element. The fields are read through the same
+// bounds-checked cursor as input.
 #include "src/tm_ticket.h"
 
 #include <algorithm>
@@ -59,7 +59,7 @@ struct Header {
     std::uint64_t entrySize() const { return hashLength + (version == kVersionWithAlgorithms ? 1U : 0U); }
     std::uint64_t size() const { return kTicketHeaderSize + count * entrySize(); }
 };
-// A count of 32 bits times an entry: neither a ticket's size nor the offset of an entry in it can leave 64
+// A count has 32 bits, so a ticket's size and the offset of an entry in it always fit 64
 // bits.
 static_assert(std::uint64_t{kHashSizes.back()} + 1 <
               std::numeric_limits<std::uint64_t>::max() / std::numeric_limits<std::uint32_t>::max());
@@ -106,7 +106,7 @@ std::optional<ticket_fault> findFault(ByteView payload, const Header& header, bo
     return std::nullopt;
 }
 
-// The version and hash length that agree with most of what is stored; the stored ones when all does.
+// The version and hash length that agree with most of the stored fields; the stored ones if all agree.
 Header likeliestLayout(const Header& stored, std::uint64_t entriesSize) {
     Header best = stored;
     int most = -1;
@@ -141,7 +141,7 @@ std::int32_t copyEntry(ByteReader entry, std::uint16_t version, std::uint16_t ha
     return kAccepted;
 }
 
-// A zeroed block that begins with the parts, one behind the other; null when memory runs out.
+// A zeroed block that begins with the parts, one after the other; null if memory runs out.
 tm_ticket_ptr makeBlock(std::uint64_t size, std::initializer_list<ByteView> parts) {
     tm_ticket_ptr ticket(new (std::nothrow) tm_ticket[static_cast<std::size_t>(size)]{});
     if (ticket == nullptr) return nullptr;

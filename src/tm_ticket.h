@@ -8,17 +8,17 @@
 //   6       2              hash length, 20 or 48
 //   8       4              number of entries
 //   12      4              flags: bit 0 means revoked, the others have no meaning
-//   16      8              signature time; carried, never interpreted (in tickets of our own making, the
+//   16      8              signature time; kept, never interpreted (in our own tickets, the
 //                          seconds since 1970-01-01 00:00:00 UTC)
 //   24      n x entrySize  entries
 //
-// An entry of version 1 is a hash; one of version 2 is an algorithm byte, then a hash. The payload is exactly
-// as long as its count says, at least 24 bytes and at most 16 MiB.
+// An entry of version 1 is a hash; an entry of version 2 is an algorithm byte, then a hash. The payload has
+// exactly the length that its count gives, from 24 bytes to 16 MiB.
 //
-// Refused when decoded: any other magic, version, hash length or size. Refused only when it is copied out: a
-// version 2 entry whose algorithm is 0 or unknown, or whose algorithm's hash is longer than the ticket's hash
-// length. The other entries of such a ticket stay usable. An algorithm whose hash is shorter takes the first
-// bytes of the entry's.
+// Refused when decoded: any other magic, version, hash length or size. Refused only on copying: a version 2
+// entry whose algorithm is 0 or unknown, or whose algorithm's hash is longer than the ticket's hash length.
+// The other entries of such a ticket stay usable. If the algorithm's hash is shorter, the first bytes of the
+// entry count.
 //
 // A ticket is immutable and independent of the bytes it was decoded from; it may be read from any thread. The
 // functions return 0 for success and -1 for any refusal, except where they say otherwise.
@@ -44,14 +44,14 @@ inline constexpr std::size_t kTicketMaximumSize = 16 * 1024 * 1024;
 /// Flag: the software must not run.
 inline constexpr std::uint32_t kTicketRevoked = 1;
 
-/// One heap block behind an opaque pointer. Whoever gets one frees it, once, with tm_ticket_free.
+/// One heap block behind an opaque pointer. The owner frees it, once, with tm_ticket_free.
 struct tm_ticket;
 
 /// One hash of a ticket.
 struct tm_cdhash {
     std::uint32_t algorithm = 0;          // 0 in version 1 tickets, which name none
     std::uint16_t length = 0;             // 20 or 48
-    std::array<std::byte, 64> hash = {};  // zero behind the first `length` bytes
+    std::array<std::byte, 64> hash = {};  // zero after the first `length` bytes
 };
 
 /// From a container to its ticket, or a refusal: satchel_get_validated_payload, then tm_ticket_decode.
@@ -71,30 +71,30 @@ struct tm_ticket_fields {
     std::uint64_t signature_time = 0;
 };
 
-/// What a payload says, whether or not it keeps to the rules: for showing a damaged one. The fields are as
-/// stored; there are none when it is shorter than its header.
+/// The fields of a payload, valid or damaged, to show a damaged one. The fields are as stored; `nullopt` if
+/// the payload is shorter than its header.
 struct tm_ticket_survey {
-    std::optional<tm_ticket_fields> header;  // nothing when it is shorter than that
+    std::optional<tm_ticket_fields> header;  // `nullopt` if it is shorter
 
-    /// How the entries are read: as the header says or, when version, hash length and count do not go
-    /// together with the payload's size, as most of them do.
+    /// How the entries are read: as the header says. If the header contradicts the payload's size, with the
+    /// version and hash length that agree with most of the header.
     std::uint16_t version = 0;
     std::uint16_t hash_length = 0;
     std::uint64_t count = 0;
     foundation::ByteView entries;  // part of the payload
 
-    /// Nothing when tm_ticket_decode accepts the payload.
+    /// `nullopt` if tm_ticket_decode accepts the payload.
     std::optional<ticket_fault> fault;
 
     std::uint64_t entry_size() const;
 };
 tm_ticket_survey tm_ticket_survey_payload(foundation::ByteView payload);
 
-/// The entry at `index` of what was surveyed, by the rules of tm_ticket_copy_cdhash.
+/// The entry at `index` of a survey, by the rules of tm_ticket_copy_cdhash.
 std::int32_t tm_ticket_survey_copy_cdhash(const tm_ticket_survey& survey, std::uint64_t index,
                                           tm_cdhash* cdhash);
 
-/// A ticket of the same bytes; null when memory runs out.
+/// A ticket of the same bytes; null if memory runs out.
 tm_ticket* tm_ticket_copy(const tm_ticket* ticket);
 
 /// Null is harmless.
@@ -109,12 +109,12 @@ std::uint32_t tm_ticket_get_cdhash_count(const tm_ticket* ticket);
 /// The entry at `index`. `cdhash` is written only on success.
 std::int32_t tm_ticket_copy_cdhash(const tm_ticket* ticket, std::uint64_t index, tm_cdhash* cdhash);
 
-/// Whether one of the entries is this hash: by its bytes, as many as the entry's algorithm has, whatever the
-/// algorithm's number. Entries that cannot be copied out are passed over.
+/// Whether one of the entries is this hash. Compares as many bytes as the entry's algorithm has, and not the
+/// algorithm's number. Skips entries that cannot be copied.
 bool tm_ticket_lists_cdhash(const tm_ticket* ticket, foundation::ByteView cdhash);
 
 /// Bytes of a code-directory hash by its algorithm, numbered as in code directories (codesign::DigestType):
-/// 20 for 0 to 3, 48 for 4; 0 when unknown.
+/// 20 for 0 to 3, 48 for 4; 0 if unknown.
 std::size_t tm_cdhash_algorithm_get_size(std::uint32_t algorithm);
 
 /// A ticket with an owner.

@@ -1,4 +1,5 @@
-// What joins the file manager to the type service: main puts it into the one, and neither knows the other.
+// Connects the file manager to the type service: main passes it to the file manager, and neither knows the
+// other.
 #pragma once
 
 #include "files/file_manager.h"
@@ -6,7 +7,7 @@
 
 namespace pinwell {
 
-/// The type of an item, from what the file manager found out about it.
+/// The type of an item, from the file manager's facts about it.
 files::ItemType nameType(types::TypeService& types, const files::ItemFacts& facts);
 
 }  // namespace pinwell

@@ -38,7 +38,7 @@ bool PWHashedBundle::writeNewTicketDataFromURL(const URL& source, ErrorOut error
                  foundation::processName(), ticket);
         return failedToWrite(std::nullopt, error);
     }
-    // The bytes alone: the source is a private temporary file, the ticket is read by whoever gets the bundle.
+    // Only the bytes: the source is a private temporary file, but everyone with the bundle reads the ticket.
     if (!files.copyContents(source, ticket)) {
         if (const auto removed = files.removeItem(ticket); !removed) {
             NoisyLog("Could not remove existing ticket from %@ because an error occurred. %@", ticket,

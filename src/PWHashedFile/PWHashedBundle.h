@@ -1,7 +1,7 @@
-// Code-signed bundles, and plain executables that are handed over as such.
+// Code-signed bundles, and plain executables.
 //
-// The ticket is a file of its own, Contents/CodeResources below the bundle's root; the cdhash is that of the
-// bundle's code signature. The ticket is written straight into the bundle, without the clone and swap of the
+// The ticket is a file of its own, Contents/CodeResources below the bundle's root; the cdhash is from the
+// bundle's code signature. The ticket is written directly into the bundle, without the clone and swap of the
 // base.
 #pragma once
 
@@ -11,20 +11,20 @@ namespace pinwell {
 
 class PWHashedBundle : public PWHashedFile {
   public:
-    /// Reads nothing of the bundle, and only holds it.
+    /// Only opens the bundle; reads nothing of it.
     using PWHashedFile::PWHashedFile;
 
-    /// Where the ticket is, or would be.
+    /// The ticket's place, with or without a ticket there.
     URL codeResourcesURL() const;
 
     /// Not atomic: between the removal of an old ticket and the copy of the new one the bundle has none.
-    /// SIGHUP, SIGINT and SIGTERM take effect afterwards.
+    /// SIGHUP, SIGINT and SIGTERM take effect after the write.
     bool writeNewTicketDataFromURL(const URL& source, ErrorOut error) override;
 
-    using PWHashedFile::_deleteExistingTicket;  // goes through the base's driver, and raises there
+    using PWHashedFile::_deleteExistingTicket;  // goes through the base's driver, and throws there
 
-    /// Moves the ticket file to the trash, whole; answers whether that went well. The exit code stays as it
-    /// is.
+    /// Moves the whole ticket file to the trash; returns whether that succeeded. Does not change the exit
+    /// code.
     bool _deleteExistingTicket();
 
     std::optional<Data> _ticketData() override;

@@ -1,9 +1,9 @@
 // UDIF disk images.
 //
-// The ticket is a blob of the code-signature superblob, which stands between the image's data and its trailer
-// (disk_image_signature.h, blob_set.h). The data are never read and never written here. An unsigned image
-// gets its superblob with its first ticket, and is known by a synthetic cdhash (synthetic_cdhash.h), which
-// the ticket does not change.
+// The ticket is a blob of the code-signature superblob, which is between the image's data and its trailer
+// (disk_image_signature.h, blob_set.h). The data are never read or written here. An unsigned image gets its
+// superblob with its first ticket. It is identified by a synthetic cdhash (synthetic_cdhash.h), which the
+// ticket does not change.
 #pragma once
 
 #include "foundation/bytes.h"
@@ -12,17 +12,17 @@
 
 namespace pinwell {
 
-/// What was read describes the file as it was when the object was made; nothing is read again after a write.
+/// Describes the file at the time of construction; nothing is read again after a write.
 class PWHashedDiskImage : public PWHashedFile {
   public:
-    /// Reads trailer and superblob; exit code 66 when they are not those of a disk image.
+    /// Reads trailer and superblob; sets exit code 66 if they are not valid.
     PWHashedDiskImage(const URL& fileURL, const Platform& platform);
 
     const UDIFFileHeader& dmgHeader() const noexcept { return signature_.trailer; }
     const foundation::SharedBytes& superblob() const noexcept { return signature_.superblob; }
     const BlobSet& blobs() const noexcept { return signature_.blobs; }
 
-    /// Of an image that was unsigned when it was read.
+    /// For an image that was unsigned when it was read.
     const std::optional<Data>& syntheticCDHash() const noexcept { return syntheticCDHash_; }
 
     /// Offsets and lengths in bytes.
@@ -33,14 +33,14 @@ class PWHashedDiskImage : public PWHashedFile {
 
     std::uint32_t numBlobs() const noexcept { return signature_.numBlobs; }
 
-    /// Why trailer and superblob are not those of a disk image, and where in the file; nothing when they are.
+    /// Why trailer or superblob is invalid, with the offset in the file; `nullopt` if both are valid.
     const std::optional<ticket_fault>& fault() const noexcept { return signature_.fault; }
 
     std::optional<Data> _ticketData() override;
     std::optional<Data> _cdHash() override;
 
-    /// Leaves a copy of what it writes in the temporary directory. Without an effect, and successful, when
-    /// the ticket to delete is the only blob there is.
+    /// Leaves a copy of the written bytes in the temporary directory. Succeeds without an effect if the
+    /// ticket to delete is the only blob.
     bool _writeNewTicketDataFromURL(const std::optional<URL>& source, const URL& target, bool deleteExisting,
                                     ErrorOut error) override;
 
@@ -57,7 +57,7 @@ class PWHashedDiskImage : public PWHashedFile {
     bool writeSignature(foundation::SparseBuffer signatureAndTrailer, const URL& target, bool deleteExisting,
                         std::optional<Error>& held);
 
-    disk_image_signature signature_;  // of an unsigned image, the empty one that was made up
+    disk_image_signature signature_;  // for an unsigned image, an empty one
     std::optional<Data> syntheticCDHash_;
     std::uint64_t endOfDMGData_ = 0;
 };

@@ -1,5 +1,5 @@
-// How a disk image gets its ticket, and loses it: a new superblob and the trailer, put where the image's data
-// end.
+// Adds and removes a disk image's ticket: writes a new superblob and the trailer at the end of the image's
+// data.
 #include <cerrno>
 #include <limits>
 #include <new>
@@ -20,7 +20,7 @@ bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& sou
     const std::string name = target.lastPathComponent();
     std::optional<Error> held;
 
-    // Empty when one is deleted, and behind the next check only then.
+    // Empty if the ticket is deleted; after the next check only then.
     const Data ticket = deleteExisting ? Data{} : readTicket(source, held);
     const bool fitsABlob = !ticket.empty() && ticket.size() <= std::numeric_limits<std::uint32_t>::max();
     if (!deleteExisting && !fitsABlob) return refuseNewTicket(target, held, error);
@@ -42,7 +42,7 @@ bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& sou
     return true;
 }
 
-// The buffer has the superblob, and room for the trailer behind it.
+// The buffer has the superblob, and space for the trailer after it.
 bool PWHashedDiskImage::writeSignature(foundation::SparseBuffer signatureAndTrailer, const URL& target,
                                        bool deleteExisting, std::optional<Error>& held) {
     const std::size_t length = signatureAndTrailer.size() - kUDIFHeaderSize;
@@ -67,7 +67,7 @@ bool PWHashedDiskImage::writeSignature(foundation::SparseBuffer signatureAndTrai
     }
 }
 
-// Should the write of the image itself be cut short, this file has what it takes to repair it by hand.
+// If the write to the image is interrupted, this file has the bytes to repair it.
 void PWHashedDiskImage::saveDebugCopy(ByteView signatureAndTrailer, std::optional<Error>& held) const {
     files::FileManager& files = platform().files;
     const URL copy = files.temporaryDirectory().appendingPathComponent(

@@ -26,13 +26,13 @@ void PWHashedFile::setAppropriateExitCode(std::int32_t code) noexcept {
 
 PWHashedFile::PWHashedFile(std::optional<URL> fileURL, const Platform& platform)
     : fileURL_(std::move(fileURL)), platform_(platform) {
-    // Before a kind reads anything. What cannot be held is not there, as the first question about it says.
+    // Before a kind reads anything. If the item cannot be held, the first access reports the error.
     if (fileURL_) held_ = platform.files.holdItem(*fileURL_).asOptional().value_or(nullptr);
 }
 
 std::shared_ptr<PWHashedFile> PWHashedFile::initWithFileURL(const URL& fileURL, const Platform& platform,
                                                             const BeforeReading& beforeReading) {
-    // From the first question on, and handed over to the object.
+    // Held from the first access on, then owned by the object.
     const auto held = platform.files.holdItem(fileURL);
     const auto properties = platform.files.resourceProperties(fileURL);
     if (!properties) {
@@ -81,7 +81,7 @@ std::optional<Data> PWHashedFile::cached(std::optional<Data>& cache,
         const std::lock_guard lock(mutex_);
         if (!cache) cache = (this->*hook)().value_or(Data{});
     }
-    // Read without the lock: once set, a cache never changes.
+    // Read without the lock: a set cache never changes.
     return cache->empty() ? std::nullopt : cache;
 }
 
@@ -104,7 +104,7 @@ bool PWHashedFile::_deleteExistingTicket(ErrorOut error) {
     return common_writeNewTicketDataFromURL(std::nullopt, true, error);
 }
 
-// The copy to work on; nothing when none can be had, and then the write goes in place.
+// The copy to work on; `nullopt` if none can be made, and then the write is in place.
 std::optional<URL> PWHashedFile::makeWorkingCopy() {
     const auto directory = platform_.files.createReplacementDirectory(*fileURL_);
     if (!directory) {
@@ -114,7 +114,7 @@ std::optional<URL> PWHashedFile::makeWorkingCopy() {
     const URL copy = directory->appendingPathComponent(fileURL_->lastPathComponent());
     if (const auto copied = platform_.files.copyItem(*fileURL_, copy); !copied) {
         NoisyLog("Could not copy backup to %@. %@", fileURL_->path(), copied.error());
-        // Nothing will be swapped from there, and nobody but us knows of it.
+        // Nothing will be swapped from there, and no other process uses it.
         static_cast<void>(platform_.files.removeItem(*directory));
         return std::nullopt;
     }
@@ -153,7 +153,7 @@ bool PWHashedFile::isAsRead() const {
 
 bool PWHashedFile::refuseChangedFile(const std::optional<URL>& workingCopy) {
     MessageLog("%@ has changed since it was read. Nothing was written to it.", fileURL_->path());
-    // What cannot be removed is a copy beside the file, and no harm.
+    // A copy that cannot be removed does no harm.
     if (workingCopy) static_cast<void>(platform_.files.removeItem(workingCopy->deletingLastPathComponent()));
     refusedAsChanged_ = true;
     setAppropriateExitCode(kExitCannotCreate);
@@ -168,11 +168,11 @@ bool PWHashedFile::common_writeNewTicketDataFromURL(const std::optional<URL>& so
     const std::optional<URL> copy = canClone ? makeWorkingCopy() : std::nullopt;
     if (!isAsRead()) return refuseChangedFile(copy);
 
-    std::optional<Error> writeError;  // not handed out: this driver reports the swap's error only
+    std::optional<Error> writeError;  // not reported: this driver reports only the swap's error
     if (!_writeNewTicketDataFromURL(source, copy.value_or(*fileURL_), deleteExisting, &writeError))
         return false;
     if (!copy) return true;
-    // Asked again: in its place would go what was made from the file as it was.
+    // Checks again: the swap would overwrite changes made since the file was read.
     if (!isAsRead()) return refuseChangedFile(copy);
 
     std::optional<Error> reported;

@@ -1,5 +1,5 @@
-// One artefact of the command line: where it is, the cdhash that identifies it, the ticket stapled to it, and
-// the exit code that the run has reached so far.
+// One artefact of the command line: its place, the cdhash that identifies it, its stapled ticket, and the
+// run's current exit code.
 #pragma once
 
 #include <atomic>
@@ -33,11 +33,11 @@ inline constexpr std::int32_t kExitNoHost = 68;
 inline constexpr std::int32_t kExitCannotCreate = 73;
 inline constexpr std::int32_t kExitNoPermission = 77;
 
-/// Where an operation may leave the error of the step that failed; null when the caller does not care.
+/// Receives the error of the failed step; null if the caller does not need it.
 using ErrorOut = std::optional<Error>*;
 
-/// The last exit code but 0 that was recorded on any hashed file of the process; 66 before the first. Every
-/// step records its failure before it begins, so this is what a run ends with that cannot finish its step.
+/// The last non-zero exit code recorded on any hashed file of the process; 66 before the first. Every step
+/// records its failure before it begins, so a run that cannot finish its step ends with this code.
 const std::atomic<std::int32_t>& lastRecordedFailure() noexcept;
 
 /// A hook was called on a kind that did not override it: a programming error.
@@ -48,16 +48,17 @@ class InternalInconsistency : public std::logic_error {
 
 /// The common model of an artefact, and the factory of the concrete kinds. Kinds override the three hooks.
 ///
-/// An object holds its artefact (files::FileManager::holdItem): all that is read and written for it, by it
-/// and by a later object of the same path that is made while it lives, is found from one descriptor.
+/// An object keeps its artefact open (files::FileManager::holdItem). All its reads and writes start from one
+/// descriptor. So do those of a later object of the same path, made while this one lives.
 ///
-/// The two lazy accessors may be called from any thread; everything else belongs to the run's single flow.
+/// Any thread may call the two lazy accessors; one step of the run at a time uses the
+/// rest.
 class PWHashedFile {
   public:
-    /// A hashed file of the right kind; the base object with exit code 66 when the file cannot be read; null
-    /// when its kind is unsupported. `platform`'s services must outlive the object.
-    /// `beforeReading`, if given, is
-    /// called when the kind is known and nothing has been read; false ends it with exit code 73.
+    /// A hashed file of the right kind; the base object with exit code 66 if the file cannot be read;
+    /// null if its kind is unsupported. `platform`'s services must outlive the object. `beforeReading`, if
+    /// given, is called when the kind is known and before anything is read. If it returns false, the exit
+    /// code is 73.
     using BeforeReading = std::function<bool()>;
     static std::shared_ptr<PWHashedFile> initWithFileURL(const URL& fileURL, const Platform& platform,
                                                          const BeforeReading& beforeReading = {});
@@ -67,7 +68,7 @@ class PWHashedFile {
     PWHashedFile(const PWHashedFile&) = delete;
     PWHashedFile& operator=(const PWHashedFile&) = delete;
 
-    /// Set when the ticket marks the software as revoked.
+    /// Whether the ticket marks the software as revoked.
     bool revoked() const noexcept { return revoked_; }
     void setRevoked(bool revoked) noexcept { revoked_ = revoked; }
 
@@ -81,29 +82,29 @@ class PWHashedFile {
 
     const std::optional<URL>& fileURL() const noexcept { return fileURL_; }
 
-    /// Whether the file still is what was read (noteState). True if no state was noted.
+    /// Whether the file is unchanged since noteState(). True if no state was noted.
     bool isAsRead() const;
 
     /// A write was refused because the file had changed since it was read.
     bool wasRefusedAsChanged() const noexcept { return refusedAsChanged_; }
 
-    /// The stapled ticket, and the cdhash; nothing when there is none. Computed once, on first use.
+    /// The stapled ticket, and the cdhash; `nullopt` if there is none. Computed once, on first use.
     std::optional<Data> ticketData();
     std::optional<Data> cdHash();
 
-    /// Staples the ticket whose bytes stand in the file at `source`.
+    /// Staples the ticket in the file at `source`.
     virtual bool writeNewTicketDataFromURL(const URL& source, ErrorOut error);
 
     /// Removes the stapled ticket.
     virtual bool _deleteExistingTicket(ErrorOut error);
 
-    /// The safe-replacement driver under both: works on a clone beside the file and swaps it into place where
-    /// the volume can clone, else in place. A failed swap still answers true, with the error handed out:
-    /// callers that need to know must look at it.
+    /// The safe-replacement driver of both. Where the volume can clone, it works on a clone beside the file
+    /// and swaps the two; elsewhere it works in place. A failed swap returns true, with the error in `error`:
+    /// callers that need to know must check it.
     ///
-    /// A file that is no longer what was read (noteState) is not written: false, and exit code 73. SIGHUP,
-    /// SIGINT and SIGTERM take effect when all is done; they would leave a file half written, or a clone
-    /// lying about.
+    /// A file that has changed since noteState() is not written: returns false, with exit code 73.
+    /// SIGHUP, SIGINT and SIGTERM take effect at the end; earlier they would leave a half-written file or
+    /// a clone.
     bool common_writeNewTicketDataFromURL(const std::optional<URL>& source, bool deleteExisting,
                                           ErrorOut error);
 
@@ -115,8 +116,8 @@ class PWHashedFile {
     /// Computes the cdhash; sets digestAlgorithm on the way.
     virtual std::optional<Data> _cdHash();
 
-    /// Writes the ticket found at `source` into `target`, or removes the one that is there. Sets the exit
-    /// code: 0, or 73 on failure, which also answers false and hands out the error.
+    /// Writes the ticket at `source` into `target`, or removes the ticket there. Sets the exit code to 0. On
+    /// failure sets it to 73, returns false and sets `error`.
     virtual bool _writeNewTicketDataFromURL(const std::optional<URL>& source, const URL& target,
                                             bool deleteExisting, ErrorOut error);
 
@@ -124,18 +125,18 @@ class PWHashedFile {
     virtual std::string_view className() const { return "PWHashedFile"; }
     const Platform& platform() const noexcept { return platform_; }
 
-    /// The ticket in that file; empty when there is none to be had, with the reason in `held` when reading
-    /// failed.
+    /// The ticket in that file; empty if there is none. If reading failed, `held` has the
+    /// reason.
     Data readTicket(const std::optional<URL>& source, std::optional<Error>& held) const;
 
-    /// Says that the target gets no new ticket, and why where that is known; then as failedToWrite.
+    /// Reports that the target gets no new ticket, with the reason if known; then like failedToWrite.
     bool refuseNewTicket(const URL& target, std::optional<Error> reason, ErrorOut error);
 
-    /// How a failed write ends: exit code 73, and the reason handed out, where there is one. Always false.
+    /// Ends a failed write: sets exit code 73, and `error` if there is a reason. Returns false.
     bool failedToWrite(std::optional<Error> reason, ErrorOut error);
 
-    /// Remembers what state the file is in, the first time only. A kind calls it before it reads what its
-    /// write will go by; without it, every state is good enough to be written to.
+    /// Notes the file's state, the first time only. A kind calls it before it reads the data that its write
+    /// depends on. Without a noted state, every file may be written to.
     void noteState();
 
   private:
@@ -156,7 +157,7 @@ class PWHashedFile {
     std::optional<foundation::Result<files::ItemState>> stateWhenRead_;
 
     std::recursive_mutex mutex_;
-    std::optional<Data> internalTicketData_;  // empty: asked, and none found
+    std::optional<Data> internalTicketData_;  // empty: read, and none found
     std::optional<Data> internalCDHash_;      // the same
 };
 

@@ -1,8 +1,8 @@
 // Signed flat installer packages.
 //
-// The ticket is a trailer behind the archive's last byte (package_trailer.h), which an archive reader never
-// gets to; the cdhash is the digest that the archive's own signature signs. Trailers of types that we do not
-// know are kept: those behind the old ticket move in front of the new one, all others stay where they are.
+// The ticket is a trailer after the archive's last byte (package_trailer.h), where no archive reader looks;
+// the cdhash is the digest that the archive's own signature signs. Trailers of unknown types are kept: the
+// ones after the old ticket move before the new one, all others keep their place.
 #pragma once
 
 #include "foundation/bytes.h"
@@ -11,14 +11,14 @@
 
 namespace pinwell {
 
-/// What was found describes the file as it was when its trailers were read, which the first ticketData()
-/// does; nothing is read again after a write.
+/// Describes the file at the time of the first ticketData(), which reads its trailers; nothing is read again
+/// after a write.
 class PWHashedFlatPackage : public PWHashedFile {
   public:
     /// No file access.
     using PWHashedFile::PWHashedFile;
 
-    /// Size of the file; offset and length of the ticket, both 0 when there is none.
+    /// Size of the file; offset and length of the ticket, both 0 if there is none.
     std::uint64_t origEOL() const noexcept { return trailers_.fileSize; }
     std::uint64_t ticketStart() const noexcept { return trailers_.ticketStart; }
     std::uint64_t ticketLength() const noexcept { return trailers_.ticketLength; }
@@ -26,7 +26,7 @@ class PWHashedFlatPackage : public PWHashedFile {
     /// There is a terminator, or a trailer of unknown type.
     bool hasTrailers() const noexcept { return trailers_.hasTrailers; }
 
-    /// The unknown trailers behind the ticket, in file order; nothing when there are none.
+    /// The unknown trailers after the ticket, in file order; `nullopt` if there are none.
     const std::optional<foundation::SharedBytes>& dataToAppend() const noexcept {
         return trailers_.dataToAppend;
     }
@@ -37,7 +37,7 @@ class PWHashedFlatPackage : public PWHashedFile {
     /// The signed digest at its full length.
     std::optional<Data> _cdHash() override;
 
-    /// A file with a terminator but no ticket is overwritten from its first byte on: known, and kept so.
+    /// Overwrites a file with a terminator but no ticket from its first byte on: known, and required.
     bool _writeNewTicketDataFromURL(const std::optional<URL>& source, const URL& target, bool deleteExisting,
                                     ErrorOut error) override;
 
@@ -50,7 +50,7 @@ class PWHashedFlatPackage : public PWHashedFile {
     std::optional<URL> saveMovedTrailers(files::FileHandle& file, foundation::SparseBuffer& tail) const;
     void writeTail(files::FileHandle& file, foundation::ByteView tail, const std::string& targetName);
 
-    package_trailers trailers_;  // but for the ticket itself, which is handed out
+    package_trailers trailers_;  // without the ticket, which was moved out
 };
 
 }  // namespace pinwell

@@ -28,7 +28,7 @@ using CopiedBytes = std::unique_ptr<std::uint8_t, Free>;
 xar_signature_t firstCMSSignature(xar_t archive) {
     for (xar_signature_t signature = xar_signature_first(archive); signature != nullptr;
          signature = xar_signature_next(signature)) {
-        const char* const type = xar_signature_type(signature);  // null when the archive gives it none
+        const char* const type = xar_signature_type(signature);  // null if the archive has none
         const std::string_view text = type == nullptr ? "" : type;
         NoisyLog("Sig Type is %s. Length is %lu", type, text.size());
         if (text == kSignatureType) return signature;
@@ -36,7 +36,7 @@ xar_signature_t firstCMSSignature(xar_t archive) {
     return nullptr;
 }
 
-// By the length of the digest, since the archive's own name for its algorithm is not asked for.
+// By the length of the digest, because the archive's own name for its algorithm is not read.
 std::uint32_t algorithmOfSize(const char* size) {
     constexpr int kDecimal = 10;
     switch (std::strtol(size, nullptr, kDecimal)) {
@@ -49,7 +49,7 @@ std::uint32_t algorithmOfSize(const char* size) {
     }
 }
 
-// The library takes an archive's handle for that of a file where its own properties are meant.
+// To read the archive's own properties, the library takes the archive's handle as a file handle.
 const char* checksumSize(xar_t archive) {
     const char* size = nullptr;
     const auto status = xar_prop_get(reinterpret_cast<xar_file_t>(archive), "checksum/size", &size);
@@ -70,7 +70,7 @@ std::optional<Data> PWHashedFlatPackage::_cdHash() {
     }
     std::uint8_t* copy = nullptr;
     std::uint32_t length = 0;
-    // The low 8 bits are the code: the library has returned it in types of more than one width.
+    // The low 8 bits are the code: the library's releases return it in types of different widths.
     const auto status = static_cast<std::uint8_t>(
         xar_signature_copy_signed_data(signature, &copy, &length, nullptr, nullptr, nullptr));
     const CopiedBytes signedData(copy);

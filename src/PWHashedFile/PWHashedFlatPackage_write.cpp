@@ -1,4 +1,4 @@
-// How a flat package gets its ticket, and loses it.
+// Adds and removes a flat package's ticket.
 #include <utility>
 
 #include "foundation/bytes.h"
@@ -17,12 +17,12 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
     const std::string targetName = target.lastPathComponent();
     std::optional<Error> held;
 
-    // Empty when one is deleted, and behind the next check only then.
+    // Empty if the ticket is deleted; after the next check only then.
     const Data ticket = deleteExisting ? Data{} : readTicket(source, held);
     if (!deleteExisting && !isWritableTicketLength(ticket.size()))
         return refuseNewTicket(target, held, error);
     const bool hasTicket =
-        ticketData().has_value();  // the question reads the trailers, on which all below rests
+        ticketData().has_value();  // this call reads the trailers, which the code below depends on
     if (deleteExisting && !hasTicket) {
         NoisyLog("Cannot delete an existing ticket in %@ that doesn't exist.", targetName);
         return failedToWrite(held, error);
@@ -37,7 +37,7 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
     std::optional<URL> copy;
     try {
         foundation::SparseBuffer tail = tailWith(ticket);
-        // A clone may be cut short: the original is still there.
+        // A write to a clone may be interrupted: the original still exists.
         if (target == fileURL()) copy = saveMovedTrailers(**opened, tail);
         writeTail(**opened, tail.view().subspan(kTrailerSize), targetName);
         if (copy) static_cast<void>(platform().files.removeItem(*copy));
@@ -51,7 +51,7 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
     return true;
 }
 
-// With room in front for what the tail belongs behind: the terminator, or the record of some trailer.
+// With space at the start for the bytes before the tail: the terminator, or a trailer's record.
 foundation::SparseBuffer PWHashedFlatPackage::tailWith(ByteView ticket) const {
     const ByteView moved = trailers_.dataToAppend ? trailers_.dataToAppend->view() : ByteView();
     const std::size_t recordSize = ticket.empty() ? 0 : kTrailerSize;
@@ -65,9 +65,9 @@ foundation::SparseBuffer PWHashedFlatPackage::tailWith(ByteView ticket) const {
     return tail;
 }
 
-// Trailers of others can be had from nowhere else. When some are about to move, all that will be written is
-// saved until it has been written, behind the bytes that it belongs behind and with their offset in the name.
-// The copy is a help: the write goes on without it.
+// Other makers' trailers exist nowhere else. So if some must move, all new bytes are saved until they are
+// written. The copy begins with the bytes before them in the package, and its name has their offset. The copy
+// is optional: the write goes on without it.
 std::optional<URL> PWHashedFlatPackage::saveMovedTrailers(files::FileHandle& file,
                                                           foundation::SparseBuffer& tail) const {
     if (!trailers_.dataToAppend || trailers_.ticketStart < kTrailerSize) return std::nullopt;
@@ -87,10 +87,10 @@ std::optional<URL> PWHashedFlatPackage::saveMovedTrailers(files::FileHandle& fil
     return copy;
 }
 
-// A write that is cut short must not leave a chain that ends in a terminator, or in a trailer of unknown
-// type, with no ticket in it: the next staple would write over the file from its first byte on. So the
-// terminator, without which a ticket is found just as well, comes last; and trailers that stood behind the
-// old ticket are made unrecognisable, by zeros behind them, before the new ones are written over them.
+// An interrupted write must not leave a chain that has a terminator or a trailer of unknown type, but no
+// ticket: the next staple would overwrite the file from its first byte on. So the terminator is written last;
+// a ticket is found without it. And before new trailers overwrite the ones after the old ticket, zeros are
+// written after those, so that they are no longer recognised.
 void PWHashedFlatPackage::writeTail(files::FileHandle& file, ByteView tail, const std::string& targetName) {
     const bool isFirst = trailers_.ticketStart == 0 && !trailers_.hasTrailers;
     const std::uint64_t start = isFirst ? file.seekToEnd() : file.seek(trailers_.ticketStart);

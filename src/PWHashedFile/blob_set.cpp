@@ -28,7 +28,7 @@ struct IndexEntry {
     auto operator<=>(const IndexEntry&) const = default;
 };
 
-// In index order; ends early where the superblob does.
+// In index order; stops early if the superblob ends.
 std::vector<IndexEntry> readIndex(ByteView superblob, std::uint32_t count) {
     std::vector<IndexEntry> entries;
     try {
@@ -40,7 +40,7 @@ std::vector<IndexEntry> readIndex(ByteView superblob, std::uint32_t count) {
             entries.push_back({slotType, reader.be32("blob offset")});
         }
     } catch (const ShortRead&) {
-        // The entries that are missing are missed by the caller.
+        // The caller detects missing entries.
     }
     return entries;
 }
@@ -54,14 +54,14 @@ bool hasEqualEntries(const std::vector<IndexEntry>& index) {
     return std::adjacent_find(sorted.begin(), sorted.end()) != sorted.end();
 }
 
-// The blob from entry.offset to `end`; nothing when it is not what its own header says. Throws ShortRead when
-// it does not lie within the superblob.
+// The blob from entry.offset to `end`; `nullopt` if its own header disagrees. Throws ShortRead if it is not
+// within the superblob.
 std::optional<BlobRecord> readBlob(ByteView superblob, const IndexEntry& entry, std::uint64_t end) {
     ByteReader reader(superblob);
     reader.seek(entry.offset, "blob");
     const std::uint32_t magic = reader.be32("blob magic");
     const std::uint64_t storedLength = reader.be32("blob length");
-    const std::uint64_t length = end - entry.offset;  // wraps when the index is out of order
+    const std::uint64_t length = end - entry.offset;  // wraps if the index is out of order
     if (length != storedLength) {
         NoisyLog("Calculated length (%tu) does not match embedded blob length (%tu)", length, storedLength);
         return std::nullopt;
@@ -70,7 +70,7 @@ std::optional<BlobRecord> readBlob(ByteView superblob, const IndexEntry& entry, 
     return BlobRecord{entry.slotType, entry.offset, magic, data};
 }
 
-/// What a ticket adds to the index and to the blobs.
+/// The bytes that a ticket adds to the index and to the blobs, besides its own.
 constexpr std::uint64_t kTicketFootprint = kBlobIndexEntrySize + kBlobHeaderSize;
 
 BlobSet withoutTickets(const BlobSet& blobs) {
@@ -81,7 +81,7 @@ BlobSet withoutTickets(const BlobSet& blobs) {
     return kept;
 }
 
-/// Of the superblob that these blobs, none of them a ticket, and the ticket make.
+/// The length of the superblob of these blobs, without old tickets, and the ticket.
 std::uint64_t lengthWith(const BlobSet& kept, ByteView ticket) {
     std::uint64_t length = kSuperblobHeaderSize;
     for (const BlobRecord& record : kept) length += kBlobIndexEntrySize + record.length();
@@ -144,7 +144,7 @@ std::optional<BlobSet> orderedBlobSetForSuperBlob(ByteView superblob, std::uint3
             blobs.push_back(*record);
         }
     } catch (const ShortRead&) {
-        // Ends the search as a wrong length does; what is not covered tells.
+        // Ends the search like a wrong length; the uncovered bytes then show the fault.
     }
 
     if (covered != superblob.size()) {

@@ -1,18 +1,18 @@
-// The code-signature superblob of a disk image, taken apart into its blobs and put together again. All
-// integers are big-endian; offsets count from the superblob's start.
+// The code-signature superblob of a disk image, split into its blobs and rebuilt. All integers are
+// big-endian; offsets count from the superblob's start.
 //
 // | Offset         | Size      | Field                                                              |
 // |----------------|-----------|--------------------------------------------------------------------|
 // | 0              | 4         | magic FADE0CC0                                                     |
-// | 4              | 4         | length of the whole, this header included                          |
+// | 4              | 4         | length of the whole, with this header                              |
 // | 8              | 4         | count of index entries                                             |
 // | 12             | 8 x count | index: slot type (4), offset of the blob (4)                       |
 // | 12 + 8 x count | rest      | blobs: magic (4), length with these 8 bytes (4), payload           |
 //
-// Stricter than what the code-signing service reads, since the parts are to be written back: the blobs follow
-// the index at once, in index order, back to back, and the last one ends where the superblob ends. Refused
-// besides: two equal index entries. No blob is looked into. There is no limit on the length or on the number
-// of blobs: a record is a view, and takes no more than twice what the smallest blob and its index entry do.
+// Stricter than the code-signing service, because the parts are written back: the blobs directly follow the
+// index, in index order, without gaps, and the last one ends with the superblob. Two equal index entries are
+// refused too. The contents of blobs are not read. There is no limit on the length or on the number of blobs:
+// a record is a view, at most twice as large as the smallest blob with its index entry.
 #pragma once
 
 #include <cstdint>
@@ -31,11 +31,11 @@ inline constexpr std::uint32_t kSuperblobHeaderSize = 12;
 inline constexpr std::uint32_t kBlobIndexEntrySize = 8;
 inline constexpr std::uint32_t kBlobHeaderSize = 8;
 
-/// The slot that a stapled ticket stands in, and the magic of its blob.
+/// The slot of a stapled ticket, and the magic of its blob.
 inline constexpr std::uint32_t kTicketSlotType = 0x10002;
 inline constexpr std::uint32_t kTicketBlobMagic = 0xFADE0B01;
 
-/// What a slot holds, in words; "unknown" for one that we do not know.
+/// The contents of a slot in words; "unknown" for an unknown slot.
 std::string_view slotName(std::uint32_t slot);
 
 /// Keys of a blob record.
@@ -64,22 +64,22 @@ struct BlobRecord {
 /// Records in index order, no two of them equal.
 using BlobSet = std::vector<BlobRecord>;
 
-/// The blobs of a whole superblob that says it has `numberOfBlobs`, as views of it. Nothing when index
-/// entries are missing or equal, or when the blobs do not fill the superblob; fewer records than
-/// `numberOfBlobs` when a blob's own length is wrong and the others fill it all the same.
+/// The blobs of a whole superblob with a stated count of `numberOfBlobs`, as views of it. Returns `nullopt`
+/// if index entries are missing or equal, or if the blobs do not fill the superblob. Returns fewer than
+/// `numberOfBlobs` records if a blob's own length is wrong but the others still fill the superblob.
 std::optional<BlobSet> orderedBlobSetForSuperBlob(foundation::ByteView superblob,
                                                   std::uint32_t numberOfBlobs);
 
-/// What stands in for a missing signature: a header that counts no blobs.
+/// The superblob for a missing signature: a header with a count of 0.
 foundation::Data emptySuperblob();
 
-/// Whether the superblob of superblobWithTicket would have a length of 32 bits, which is all that its header
-/// has room for.
+/// Whether the length of superblobWithTicket's result fits the 32 bits in its
+/// header.
 bool hasRoomForTicket(const BlobSet& blobs, foundation::ByteView ticket);
 
-/// The superblob of all of `blobs` that are no ticket, followed by `ticket` in a blob of its own unless it is
-/// empty, and by `spare` zero bytes for what the caller puts behind it. Empty when that leaves no blob at
-/// all. hasRoomForTicket must hold. Throws std::bad_alloc.
+/// The superblob of all of `blobs` except tickets, then `ticket` in its own blob unless it is empty, then
+/// `spare` zero bytes for the caller to fill. Empty if no blob remains. hasRoomForTicket must hold. Throws
+/// std::bad_alloc.
 foundation::SparseBuffer superblobWithTicket(const BlobSet& blobs, foundation::ByteView ticket,
                                              std::size_t spare = 0);
 

@@ -14,10 +14,10 @@ namespace {
 using foundation::ByteReader;
 using foundation::ByteView;
 
-/// The least that a blob takes: its index entry and its header.
+/// The minimum size of a blob: its index entry and its header.
 constexpr std::uint64_t kMinimumBlobFootprint = kBlobIndexEntrySize + kBlobHeaderSize;
 
-// Whether `step` went through; a failure's reason goes to `report`.
+// Whether `step` succeeded; a failure's reason goes to `report`.
 template <class Step, class Report>
 void attempt(Step&& step, Report&& report) {
     try {
@@ -34,8 +34,8 @@ bool disk_image_signature::refuse(std::uint64_t offset, const char* rule) {
     return false;
 }
 
-// What cannot be read is only said here: the zeros in its place fail the next check, with a message of its
-// own.
+// A read error is only reported here: the zeros instead of the bytes fail the next check, with its own
+// message.
 bool readDiskImageTrailer(files::FileReader& file, const std::string& name, disk_image_signature& into) {
     attempt([&] { into.fileSize = file.seekToEnd(); },
             [&](const char* reason) {
@@ -98,7 +98,7 @@ bool readDiskImageSuperblob(files::FileReader& file, const std::string& name, di
 }
 
 bool readDiskImageBlobs(const std::string& name, disk_image_signature& into) {
-    std::array<std::byte, kSuperblobHeaderSize> header{};  // of a shorter superblob the rest is zero
+    std::array<std::byte, kSuperblobHeaderSize> header{};  // for a shorter superblob the rest is zero
     const ByteView start = into.superblob.view().first(std::min(into.superblob.size(), header.size()));
     std::copy(start.begin(), start.end(), header.begin());
     ByteReader reader(header);

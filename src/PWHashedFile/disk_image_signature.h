@@ -1,14 +1,14 @@
-// Where a disk image's signature stands, and what stands in it: trailer (udif_header.h), then superblob
+// The place and the contents of a disk image's signature: trailer (udif_header.h), then superblob
 // (blob_set.h).
 //
 // | From         | To           | What                                                             |
 // |--------------|--------------|------------------------------------------------------------------|
-// | 0            | csStart      | the image's data, not looked at here                             |
-// | csStart      | size - 512   | the superblob; nothing in unsigned images                        |
-// | size - 512   | size         | the trailer, which says where the superblob stands               |
+// | 0            | csStart      | the image's data, not read here                                  |
+// | csStart      | size - 512   | the superblob; empty in unsigned images                          |
+// | size - 512   | size         | the trailer, which gives the superblob's place                   |
 //
-// The steps are taken in this order, each when the one before has answered true. A step that answers false
-// has left its reason in `fault`, and a message for the verbose mode. None throws.
+// The steps are called in this order, each only if the one before returned true. A step that returns false
+// leaves its reason in `fault`, and a message for the verbose mode. No step throws.
 #pragma once
 
 #include <cstdint>
@@ -33,30 +33,30 @@ struct disk_image_signature {
     std::uint32_t numBlobs = 0;  // as stated
     BlobSet blobs;               // views of the superblob
 
-    /// Why these are not a disk image's, and where in the file.
+    /// Why these are not valid, with the offset in the file.
     std::optional<ticket_fault> fault;
 
-    /// As the trailer has it; an unsigned image has no superblob to read.
+    /// As the trailer says; an unsigned image has no superblob.
     bool isSigned() const noexcept { return csStart != 0 && csLength != 0; }
 
-    /// Always false, for the step that ends with it.
+    /// Returns false, for the step to return.
     bool refuse(std::uint64_t offset, const char* rule);
 };
 
-/// Reads the trailer: what kind of file it is, and where the superblob stands. `name` is for the messages.
+/// Reads the trailer: the kind of the file, and the superblob's place. `name` is for the messages.
 bool readDiskImageTrailer(files::FileReader& file, const std::string& name, disk_image_signature& into);
 
-/// Reads the superblob of a signed image, whole: memory is taken for what is there, not for holes and zeros.
-/// One that is longer than its own length field can say is left after its header, by which it is refused.
+/// Reads the whole superblob of a signed image. Holes and zeros take no memory. If it is too long for its own
+/// length field, only its header is read, and the superblob is refused.
 bool readDiskImageSuperblob(files::FileReader& file, const std::string& name, disk_image_signature& into);
 
-/// Takes the superblob apart.
+/// Splits the superblob.
 bool readDiskImageBlobs(const std::string& name, disk_image_signature& into);
 
-/// The blob of the stapled ticket, the last one that stands in its slot; null when there is none.
+/// The blob of the stapled ticket: the last one in its slot; null if there is none.
 const BlobRecord* ticketBlobOf(const BlobSet& blobs);
 
-/// The ticket in its blob: what stands behind the blob's header.
+/// The ticket in its blob: the bytes after the blob's header.
 foundation::ByteView ticketIn(const BlobRecord& blob);
 
 }  // namespace pinwell

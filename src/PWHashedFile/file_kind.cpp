@@ -13,7 +13,7 @@ constexpr std::array<std::string_view, 4> kPackageTypes{
     "com.ostrel.installer-meta-package",
 };
 
-// A plain executable is handled as a bundle: it has a cdhash, though no place for a ticket.
+// A plain executable is handled as a bundle: it has a cdhash, but no place for a ticket.
 constexpr std::array<std::string_view, 7> kExecutableAndBundleTypes{
     "public.unix-executable",
     "com.ostrel.application",

@@ -1,8 +1,8 @@
 // How much of a stapled ticket is held in memory.
 //
-// A stale ticket may have any length, and is replaced whatever it is. None is accepted that is longer than
-// its parts' maxima come to; so of a longer one the beginning is held, which is refused as the whole would
-// be.
+// A stale ticket may have any length and content, and can be replaced. A ticket longer than the sum
+// of its parts' maxima is never accepted. So only its beginning is held, which is refused like the
+// whole.
 #pragma once
 
 #include <algorithm>
@@ -19,7 +19,7 @@ static_assert(kSatchelMaximumCertificates * kSatchelMaximumCertificateSize + kTi
                   kLongestTicketHeld / 2,
               "what is cut off belongs to no ticket that is accepted");
 
-/// What is held of a ticket of that many bytes.
+/// How many bytes of a ticket of that length are held.
 inline std::uint64_t heldOfTicket(std::uint64_t length) {
     return std::min(length, kLongestTicketHeld);
 }

@@ -18,8 +18,8 @@ using foundation::Data;
 using foundation::SharedBytes;
 using foundation::SparseBuffer;
 
-// What is met on the way backwards through a file, as pieces that are back to front. Short ones share a
-// buffer in which the bytes are back to front as well, so that to put something in front is to append.
+// Collects pieces on the way backwards through a file, in reverse order. Short pieces share a buffer with
+// reversed bytes, so that inserting at the start is an append.
 class BackwardCollection {
   public:
     void putInFront(SharedBytes bytes) {
@@ -100,8 +100,8 @@ class Walk {
         found_.dataToAppend = std::move(unknown_).inFileOrder();
     }
 
-    // Where the trailer that ends at `position` begins; nothing where the walk ends. A walk that comes upon
-    // the start of the file is not whole: what it has collected is none of its business.
+    // The start of the trailer that ends at `position`; `nullopt` where the walk ends. If the walk reaches
+    // the start of the file, it is not whole, and the collected pieces are not used.
     std::optional<std::uint64_t> step(std::uint64_t position, bool& isWhole) {
         if (position < kTrailerSize) {
             isWhole = false;

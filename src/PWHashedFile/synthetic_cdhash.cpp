@@ -22,7 +22,7 @@ Array arrayOf(const std::vector<Element>& elements) {
     return Array(elements.begin(), elements.end());
 }
 
-// As the verbose dump shows it: what is not there has no entry.
+// For the verbose dump: missing values have no entry.
 Dictionary dictionaryOf(const SigningInformation& information) {
     Dictionary dictionary;
     const auto store = [&](std::string_view key, const auto& value) {
@@ -39,7 +39,7 @@ Dictionary dictionaryOf(const SigningInformation& information) {
     return dictionary;
 }
 
-// Signs `code` in memory and has it answer from that signature.
+// Signs `code` in memory and attaches that signature to it.
 Status signDetached(codesign::CodeSigningService& service, codesign::StaticCode& code) {
     codesign::SignerParameters parameters;
     parameters.identifier = kIdentifier;
@@ -88,7 +88,7 @@ Status syntheticCDHashForURL(const foundation::URL& fileURL, const Platform& pla
 
     const auto& algorithms = information->digestAlgorithms;
     if (algorithms.empty() || algorithms.size() != information->cdHashes.size()) {
-        // No failure: the caller goes on without a cdhash and finds out for itself.
+        // Not a failure: the caller goes on and notices the missing cdhash.
         NoisyLog("Could not get newly minted CD hash for %@.", fileURL.lastPathComponent());
         return codesign::kSuccess;
     }

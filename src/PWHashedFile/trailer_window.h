@@ -1,6 +1,6 @@
-// A file read backwards in small steps, through a window that moves along with them: a chain of a million
-// empty trailers costs a few reads for each mebibyte, and not four calls for each trailer. The window is
-// small at first: most chains are short.
+// Reads a file backwards in small steps through a moving window. So a chain of a million empty trailers costs
+// a few reads for each mebibyte, instead of four calls for each trailer. The window is small at first: most
+// chains are short.
 #pragma once
 
 #include <cstdint>
@@ -26,7 +26,7 @@ class TrailerWindow {
 
     files::FileReader& file_;
     foundation::Data bytes_;
-    std::uint64_t next_ = 1024;  // to be read by the next load
+    std::uint64_t next_ = 1024;  // length of the next load
     std::uint64_t start_ = 0;    // of the bytes, in the file
 };
 

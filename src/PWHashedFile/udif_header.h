@@ -14,15 +14,15 @@
 // | 80     | 136  | fUDIFDataForkChecksum: type (4), length (4), data (128)                        |
 // | 216    | 16   | fUDIFXMLOffset, fUDIFXMLLength                                                 |
 // | 232    | 64   | fUDIFExternal                                                                  |
-// | 296    | 8    | fUDIFCodeSignOffset: where the superblob begins in the file; 0 when unsigned   |
-// | 304    | 8    | fUDIFCodeSignLength: length of the superblob; 0 when unsigned                  |
+// | 296    | 8    | fUDIFCodeSignOffset: offset of the superblob in the file; 0 if unsigned        |
+// | 304    | 8    | fUDIFCodeSignLength: length of the superblob; 0 if unsigned                    |
 // | 312    | 40   | fReserved                                                                      |
 // | 352    | 136  | fUDIFMasterChecksum: type (4), length (4), data (128)                          |
 // | 488    | 4    | fUDIFImageVariant                                                              |
 // | 492    | 8    | fUDIFSectorCount, unaligned                                                    |
 // | 500    | 12   | fPadding                                                                       |
 //
-// Only the first two and the two code-signature fields have a meaning here; all others are carried as stored.
+// Only the first two and the two code-signature fields are interpreted; all others are kept as stored.
 #pragma once
 
 #include <array>
@@ -33,7 +33,7 @@
 namespace pinwell {
 
 inline constexpr std::size_t kUDIFHeaderSize = 512;
-/// Of fUDIFCodeSignOffset and, behind it, fUDIFCodeSignLength.
+/// The offset of fUDIFCodeSignOffset, which fUDIFCodeSignLength follows.
 inline constexpr std::size_t kUDIFCodeSignFieldsOffset = 296;
 inline constexpr std::uint32_t kUDIFMagic = 0x6B6F6C79;  // "koly"
 inline constexpr std::uint32_t kUDIFVersion = 4;
@@ -41,19 +41,19 @@ inline constexpr std::uint32_t kUDIFVersion = 4;
 /// The 512 bytes as stored; single fields are converted when they are read or written. All zero at first.
 class UDIFFileHeader {
   public:
-    /// Takes over `bytes` when they are exactly 512, and answers whether they were.
+    /// Copies `bytes` if there are exactly 512; returns whether there are.
     bool assign(foundation::ByteView bytes);
 
     bool hasMagic() const;
 
-    /// The magic's four bytes as a little-endian number, as messages show what is there in its place.
+    /// The magic's four bytes as a little-endian number, as messages show a wrong magic.
     std::uint32_t magicAsShown() const;
 
     std::uint32_t version() const;
     std::uint64_t codeSignOffset() const;
     std::uint64_t codeSignLength() const;
 
-    /// Changes these two fields and no other.
+    /// Changes only these two fields.
     void setCodeSign(std::uint64_t offset, std::uint64_t length);
 
     foundation::ByteView bytes() const noexcept { return bytes_; }
