@@ -9,8 +9,8 @@ namespace pinwell::batch {
 
 inline constexpr const char* kProgramName = "pinwell-batch";
 
-/// Fills in the settings. Returns the exit status if the process is to end: the help was printed, or what is
-/// wrong with the line.
+/// Fills in the settings. Returns the exit status if the process must end: the help or an error was
+/// printed.
 std::optional<int> readCommandLine(int argc, char** argv, Settings& settings);
 
 }  // namespace pinwell::batch

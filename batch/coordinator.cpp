@@ -17,8 +17,8 @@ using retrieval::Outcome;
 
 namespace {
 
-// How long a group that could still grow waits for more, and how long one may be at the service before
-// another one goes beside it.
+// How long an incomplete group waits for more items, and how long a group may be at the service before
+// another one is sent.
 constexpr std::chrono::milliseconds kGathering{20};
 constexpr std::chrono::seconds kPatienceWithAGroup{1};
 
@@ -149,7 +149,7 @@ void Coordinator::takeWorked(const Worked& worked) {
 
 void Coordinator::takeAnswers(Answered answered) {
     --groups_;
-    const double chance = retrieval::randomChance();  // one for all, so that they stay a group
+    const double chance = retrieval::randomChance();  // one for all, so that the group stays together
     for (std::size_t i = 0; i < answered.group.size(); ++i)
         if (!answered.group[i]->hasEnded)
             takeAnswer(answered.group[i], std::move(answered.answers[i]), chance);
@@ -197,7 +197,7 @@ void Coordinator::waitNoMore(Item& item) {
     if (std::exchange(item.isWaiting, false)) --waitingItems_;
 }
 
-// Artefacts begin one after another and have the same time each, so that the first is the first to be late.
+// Artefacts begin one after another and have the same time limit, so the first is overdue first.
 void Coordinator::endOverdue() {
     const auto now = Clock::now();
     if (deadline_ && now >= *deadline_ && !isOver_) {
@@ -208,7 +208,7 @@ void Coordinator::endOverdue() {
         const ItemRef first = byDeadline_.front().lock();
         if (first && !first->hasEnded) {
             if (*first->deadline > now) return;
-            // What is being written is written to its end, and counts.
+            // A running write is finished, and its result counts.
             if (!first->isAtWork) end(first, {kExitNoHost, Cause::timedOut});
         }
         byDeadline_.pop_front();
@@ -247,7 +247,7 @@ void Coordinator::startLookups() {
         const auto count = std::min(toLookUp_.size(), retrieval::kNamesPerRequest);
         std::vector<ItemRef> group(toLookUp_.begin(), toLookUp_.begin() + static_cast<std::ptrdiff_t>(count));
         toLookUp_.erase(toLookUp_.begin(), toLookUp_.begin() + static_cast<std::ptrdiff_t>(count));
-        // The last of its items decides how long it may take.
+        // Its last item decides the deadline.
         std::optional<Clock::time_point> deadline = group.front()->deadline;
         for (const ItemRef& item : group)
             if (deadline) deadline = std::max(*deadline, *item->deadline);
@@ -263,7 +263,7 @@ void Coordinator::startLookups() {
 }
 
 void Coordinator::startWork() {
-    const std::size_t mostAtWork = settings_.jobs * 2;  // one each beside the one that is worked on
+    const std::size_t mostAtWork = settings_.jobs * 2;  // one waiting for each one in work
     while (!toFinish_.empty() && atWork_ < mostAtWork) {
         const ItemRef item = std::move(toFinish_.front());
         toFinish_.pop_front();
@@ -275,7 +275,7 @@ void Coordinator::startWork() {
         if (!beginNext()) return;
 }
 
-// False if there is no path, now or ever.
+// Returns false if there is no path now or later.
 bool Coordinator::beginNext() {
     std::string path;
     if (list_ == companion::PathList::State::end || list_ == companion::PathList::State::broken) return false;
@@ -287,7 +287,7 @@ bool Coordinator::beginNext() {
         endUnbegun(path, signal_ ? Cause::interrupted : Cause::timedOut);
         return true;
     }
-    const ItemRef item(std::make_unique<Item>());  // apart from its count, which a weak reference keeps
+    const ItemRef item(std::make_unique<Item>());  // separate from its count, which weak references keep
     item->path = std::move(path);
     item->begun = Clock::now();
     if (settings_.timeout) {

@@ -1,9 +1,9 @@
-// The batch itself: takes paths from the list, hands artefacts to threads and lookups to the record service,
-// and reports each one as it ends.
+// The batch itself: takes paths from the list, passes artefacts to threads and lookups to the record service,
+// and reports each artefact when it ends.
 //
-// One thread decides everything, in a loop around poll(2); the others work on what they are given and put the
-// result in a queue. Between two turns of the loop an artefact is in one place: with a worker, in the queue
-// for a lookup, with the record service, waiting for its next try, or in the queue for its second half.
+// One thread decides everything, in a loop around poll(2). The others do the work that it assigns, and put
+// the results in a queue. Between two turns of the loop an artefact is in one place: with a worker, in the
+// queue for a lookup, with the record service, waiting for its retry, or in the queue for its second half.
 #pragma once
 
 #include <cstddef>
@@ -24,47 +24,47 @@
 
 namespace pinwell::batch {
 
-/// The most artefacts that are held with all that was read of them, and the most at all, waiting ones
-/// included.
+/// The maximum number of artefacts held with all their data, and the maximum number of all, with the waiting
+/// ones.
 inline constexpr std::size_t kMostInWork = 512;
 inline constexpr std::size_t kMostBegun = 16384;
 
 class Coordinator {
   public:
-    /// What the coordinator tells, on its own thread.
+    /// Called by the coordinator, on its own thread.
     struct Events {
-        /// Whether the artefact at this path is to be worked on; false for another part's, and for one that
-        /// was named before.
+        /// Whether to work on the artefact at this path; false if it belongs to another part, or was named
+        /// before.
         std::function<bool(const std::string& path)> isWanted;
         /// `filesState` is as ArtefactRun has it; empty if the artefact was not begun.
         std::function<void(const Report& report, const std::string& filesState)> ended;
-        /// Whether an earlier run has done what was begun. On a worker's thread.
+        /// Whether an earlier run has already done this artefact. On a worker's thread.
         std::function<bool(const std::string& path, const retrieval::ArtefactRun& run)> isDoneBefore;
         std::function<void()> wasDoneBefore;
-        /// Once a turn: how many have begun and have not ended.
+        /// Once in each turn: how many have begun and not ended.
         std::function<void(std::size_t inWork)> turned;
     };
 
-    /// `signals` is readable when a signal has come that ends the run (signalfd(2)).
+    /// `signals` is readable after a signal that ends the run (signalfd(2)).
     Coordinator(const Settings& settings, const Platform& platform, companion::PathList& paths,
                 const foundation::FileDescriptor& signals, Events events);
     ~Coordinator();
     Coordinator(const Coordinator&) = delete;
     Coordinator& operator=(const Coordinator&) = delete;
 
-    /// Works on all of the list. Returns the signal that ended it, if one did.
+    /// Works on the whole list. Returns the signal that ended it, if any.
     std::optional<int> run();
 
-    /// Whether the list held a path at all.
+    /// Whether the list held any path.
     bool hasSeenPaths() const noexcept { return hasSeenPaths_; }
 
-    /// Why the list could not be read to its end.
+    /// The error that stopped reading the list.
     const std::optional<foundation::Error>& listError() const noexcept { return paths_.error(); }
 
   private:
     struct Worked {
         ItemRef item;
-        std::optional<retrieval::Outcome> outcome;  // `nullopt`: a record is to be looked up
+        std::optional<retrieval::Outcome> outcome;  // `nullopt`: a record must be looked up
     };
     struct Answered {
         std::vector<ItemRef> group;
@@ -106,17 +106,17 @@ class Coordinator {
     bool hasSeenPaths_ = false;
     companion::PathList::State list_ = companion::PathList::State::path;
     std::optional<int> signal_;
-    bool isOver_ = false;  // nothing more is begun
+    bool isOver_ = false;  // no more artefacts begin
 
     std::size_t begun_ = 0;   // and not ended
     std::size_t atWork_ = 0;  // with the workers
     std::size_t groups_ = 0;  // with the record service
     std::optional<Clock::time_point> lastGroupBegan_;
     std::deque<ItemRef> toLookUp_;
-    std::optional<Clock::time_point> firstToLookUp_;  // since when there are any
+    std::optional<Clock::time_point> firstToLookUp_;  // when the first one came
     std::deque<ItemRef> toFinish_;
-    std::multimap<Clock::time_point, ItemRef> waiting_;  // some of which may have ended
-    std::size_t waitingItems_ = 0;                       // those that have not
+    std::multimap<Clock::time_point, ItemRef> waiting_;  // some may have ended
+    std::size_t waitingItems_ = 0;                       // the ones that have not ended
     std::deque<std::weak_ptr<Item>> byDeadline_;
 
     WakeUp news_;

@@ -1,4 +1,4 @@
-// One artefact of a batch on its way.
+// One artefact of a batch in progress.
 #pragma once
 
 #include <chrono>
@@ -15,8 +15,8 @@ namespace pinwell::batch {
 
 using retrieval::Clock;
 
-/// Belongs to the coordinator's thread, except while a worker has it (`isAtWork`): then run and answer are
-/// the worker's.
+/// Belongs to the coordinator's thread. While a worker has it (`isAtWork`), `run` and `answer` belong to the
+/// worker.
 struct Item {
     std::string path;
     std::unique_ptr<retrieval::ArtefactRun> run;
@@ -30,8 +30,8 @@ struct Item {
     bool hasEnded = false;
 
     unsigned attempts = 0;  // lookups
-    unsigned failures = 0;  // of them, those that came to nothing
-    unsigned polls = 0;     // of them, those that said that there is no ticket yet
+    unsigned failures = 0;  // lookups without a result
+    unsigned polls = 0;     // lookups whose result was: no ticket yet
     std::optional<Clock::time_point> notIssuedSince;
     std::optional<foundation::Error> lastError;
 };

@@ -65,7 +65,7 @@ std::optional<std::array<std::string_view, kFields>> fieldsOf(std::string_view l
 }  // namespace
 
 Result<Journal> Journal::open(const std::string& path) {
-    constexpr mode_t kMode = 0666;  // less the user's mask
+    constexpr mode_t kMode = 0666;  // without the bits of the user's mask
     foundation::FileDescriptor file(
         ::open(path.c_str(), O_RDWR | O_APPEND | O_CREAT | O_CLOEXEC | O_NOCTTY | O_NONBLOCK, kMode));
     if (!file) return Error::posix(errno, path);
@@ -108,7 +108,7 @@ Result<void> Journal::read() {
         return Error(foundation::kDataErrorDomain, foundation::kMalformedDocument,
                      path_ + " is not a journal of pinwell-batch.");
     if (isFirst) return append(kFirstLine.substr(line.size()));
-    // What a run that was killed has left of a line is a line of its own, and no good one.
+    // Ends a partial line of a killed run, which is then a malformed line.
     return line.empty() ? Result<void>() : append("\n");
 }
 

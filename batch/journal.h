@@ -1,18 +1,18 @@
-// What an earlier run has done, so that the next one leaves it out.
+// The journal of finished artefacts: the next run skips them.
 //
-// A text file, appended to as artefacts end, one line in one write. The first line is "pinwell-batch journal
-// 1". Each other one has six fields with a space between them, or two:
+// A text file. Each artefact that ends appends one line in one write. The first line is "pinwell-batch
+// journal 1". Every other line has six fields with a space between them, or two:
 //
 //   STATUS CAUSE OPERATION STATE RECORDNAME PATH
 //   ended OPERATION
 //
-// STATE tells the artefact's files from what is there later (ArtefactRun::filesState); "-" stands for what is
-// not known. The path is absolute; bytes of it that are no printable ASCII, and "%", are "%" and two
-// hexadecimal digits. Of several lines for a path the last one counts. A line without its end, as a run that
-// was killed may leave it, counts for nothing, and neither does one that is malformed.
+// STATE identifies the state of the artefact's files (ArtefactRun::filesState); "-" means unknown. PATH is
+// absolute; "%" and bytes outside printable ASCII are written as "%" and two hexadecimal digits. If a path
+// has several lines, the last one counts. A malformed line is ignored, and so is a line without its end,
+// which a killed run may leave.
 //
-// After an "ended" line, what lines before it say of its operation counts no more: the run had come to its
-// end, and the next one begins anew.
+// An "ended" line cancels all earlier lines of its operation: that run was complete, and the next one starts
+// from the beginning.
 #pragma once
 
 #include <cstdint>
@@ -29,31 +29,31 @@
 
 namespace pinwell::batch {
 
-/// What an artefact was: by path, and by what is at the path.
+/// The identity of an artefact: its path, and the state of its files.
 struct JournalItem {
     std::string path;  // canonicalPath()
     std::uint8_t operation = 0;
-    std::string filesState;  // without a space; empty if it is not known
+    std::string filesState;  // without a space; empty if unknown
     std::string recordName;
 };
 
-/// For the coordinator's thread, except hasDone(), which is for all once the journal is open.
+/// For the coordinator's thread. Any thread may call hasDone() on an open journal.
 class Journal {
   public:
-    /// Reads what is there, and makes the file if there is none. An error names the file, also if it is none
-    /// of ours: nothing is appended to that.
+    /// Reads the file, or creates it. Returns an error that names the file, also if it is not a journal; such
+    /// a file is not changed.
     static foundation::Result<Journal> open(const std::string& path);
 
-    /// Whether it was there as it is now when the journal was opened, and had worked.
+    /// Whether the journal, when it was opened, listed this item in this state as successful.
     bool hasDone(const JournalItem& item) const;
 
-    /// Appends how an artefact ended. Returns an error if that cannot be written.
+    /// Appends the result of an artefact. Returns an error if it cannot be written.
     foundation::Result<void> add(const JournalItem& item, int exitStatus, retrieval::Cause cause);
 
-    /// Appends that a run has come to its end, and with it all that the journal says of the operation.
+    /// Appends an "ended" line, which cancels all earlier lines of the operation.
     foundation::Result<void> end(std::uint8_t operation);
 
-    /// Returns when all of it is on stable storage.
+    /// Returns when the whole journal is on stable storage.
     foundation::Result<void> synchronize();
 
   private:
@@ -65,10 +65,10 @@ class Journal {
 
     std::string path_;
     foundation::FileDescriptor file_;
-    bool endsWithinALine_ = false;  // since a write was cut short
+    bool endsWithinALine_ = false;  // after an incomplete write
 
-    // By the operation's name, and by the path as it is in the file: the state and the record's name. As
-    // digests, so that a long journal takes some 60 bytes a path.
+    // From the operation's name and the path, as in the file, to the state and the record's name. As digests,
+    // so that a long journal takes some 60 bytes for each path.
     struct FirstHalf {
         std::size_t operator()(const TextDigest& digest) const noexcept { return digest.first; }
     };

@@ -22,7 +22,7 @@ using foundation::Result;
 using retrieval::Cause;
 
 constexpr std::size_t kReportPieceSize = std::size_t{64} * 1024;
-// Room for the counts, which are known at the end: blanks between attributes have no meaning.
+// Space for the counts, which are known at the end: blanks between attributes have no meaning.
 constexpr std::size_t kCountsWidth = 160;
 
 std::string secondsText(double seconds) {
@@ -50,8 +50,8 @@ bool beginsAsXml(const std::string& path) {
            std::string_view(bytes.data(), bytes.size()) == kBeginning;
 }
 
-// An option without its argument takes the first artefact for it, which must not be lost to a report.
-// What is to be replaced must be a file: a device's name would be a file's from then on. A link stays one.
+// If the option's argument is missing, the option takes the first artefact instead. A report must not
+// overwrite it. Only a file may be replaced: a device would become a file. A link stays a link.
 Result<std::string> placeOfReport(const std::string& path) {
     struct stat status {};
     if (::stat(path.c_str(), &status) != 0) {
@@ -125,7 +125,7 @@ void JUnitReport::add(const Report& report) {
         write(text + "/>\n");
         return;
     }
-    // What says something of the artefact fails; what kept it from being looked at is an error.
+    // A verdict on the artefact is a failure; anything that prevented a verdict is an error.
     const char* const element = isVerdict(report.cause) ? "failure" : "error";
     text += std::string(">\n<") + element + " type=\"" + std::string(nameOf(report.cause)) + "\" message=\"" +
             std::string(nameOf(report.cause)) + ": exit status " + std::to_string(report.exitStatus) + "\">";

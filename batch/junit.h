@@ -1,4 +1,4 @@
-// A JUnit report, as continuous integration systems show it: one test case an artefact.
+// A JUnit report for continuous integration systems: one test case for each artefact.
 #pragma once
 
 #include <memory>
@@ -10,17 +10,17 @@
 
 namespace pinwell::batch {
 
-/// Test cases are written as they come, to a file beside the one that is wanted, which takes its place at the
-/// end. A report that is not finished is removed.
+/// Writes each test case at once, to a temporary file beside the report, which replaces the report at the
+/// end. An unfinished report is removed.
 class JUnitReport {
   public:
-    /// An error names what is there and no file, or cannot be written.
+    /// Returns an error that names the path if it is not a regular file or cannot be written.
     static foundation::Result<JUnitReport> begin(const std::string& name);
     JUnitReport(JUnitReport&& other) noexcept;
     JUnitReport& operator=(JUnitReport&&) = delete;
     ~JUnitReport();
 
-    /// Where it will be: no link, but what the link led to.
+    /// The report's path, with a link resolved.
     const std::string& path() const noexcept { return path_; }
 
     void add(const Report& report);
@@ -35,13 +35,14 @@ class JUnitReport {
     void flush();
 
     std::string path_;
-    std::string temporary_;  // empty once it is in place, or moved from
+    std::string temporary_;  // empty if the report is in place, or moved from
     foundation::FileDescriptor file_;
     std::string pending_;
     int failure_ = 0;  // errno of the first write that failed
 };
 
-/// Text as XML 1.0 has it, in an attribute or between tags. Control characters are escaped as on a terminal.
+/// Escapes text for XML 1.0, for an attribute or between tags. Control characters are escaped as on a
+/// terminal.
 std::string escapedForXml(const std::string& text);
 
 }  // namespace pinwell::batch

@@ -11,7 +11,7 @@ Lookups::~Lookups() {
 }
 
 void Lookups::ask(std::vector<ItemRef> group, std::optional<Clock::time_point> deadline) {
-    // The names are read here: what else there is in an item belongs to another thread by then.
+    // The names are read here: the rest of an item may belong to another thread later.
     std::vector<std::string> names;
     for (const ItemRef& item : group) names.push_back(item->run->recordName());
     threads_.add([this, deadline, names = std::move(names), group = std::move(group)]() mutable {

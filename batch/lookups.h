@@ -1,4 +1,4 @@
-// Lookups under way: groups of items at the record service, each on a thread of its own.
+// Lookups in progress: groups of items at the record service, each on a thread of its own.
 #pragma once
 
 #include <functional>
@@ -13,7 +13,8 @@
 
 namespace pinwell::batch {
 
-/// The most groups at once. One is enough as long as it is answered; the others are for when it is not.
+/// The maximum number of groups at once. One is enough if the service responds; the others are for slow
+/// responses.
 inline constexpr std::size_t kMostGroups = 4;
 
 class Lookups {
@@ -23,7 +24,7 @@ class Lookups {
     /// `take` gets each group with its answers, on a thread of this object's own.
     Lookups(const Platform& platform, Take take);
 
-    /// Cancels what is under way, and waits for it.
+    /// Cancels the running lookups, and waits for them.
     ~Lookups();
     Lookups(const Lookups&) = delete;
     Lookups& operator=(const Lookups&) = delete;
@@ -31,7 +32,7 @@ class Lookups {
     /// Asks for the records of at most kNamesPerRequest items. Returns at once.
     void ask(std::vector<ItemRef> group, std::optional<Clock::time_point> deadline);
 
-    /// What is under way ends soon, and so does all that is asked later.
+    /// The running lookups end soon, and all later ones too.
     void cancel() { cancellation_.cancel(); }
 
   private:

@@ -67,7 +67,7 @@ class Run {
         return finish();
     }
 
-    /// All artefacts worked, whatever became of the files that say so.
+    /// Whether all artefacts worked, even if the journal or the report failed.
     bool wentWell() const { return summary_.exitStatus == EX_OK; }
 
   private:
@@ -107,8 +107,8 @@ class Run {
         if (!settings_.isQuiet) print(asText(report, settings_.isVerbose, inColor_));
     }
 
-    // A ticket may be revoked any time: a validation that has come to its end does not count for the next
-    // one. What nobody got to look at is still to be done, though, and a staple is done once for all.
+    // A ticket may be revoked at any time, so a complete validation does not count for the next one. But a
+    // run with unjudged artefacts is not complete, and a staple stays done.
     void endJournal() {
         if (settings_.operation == kOperationValidate && summary_.holdsVerdictsOnly())
             keep(journal_->end(settings_.operation));
@@ -119,7 +119,7 @@ class Run {
         output_.write(line + "\n");
     }
 
-    // The first failure to write a file of ours is said once; the artefacts are what matters.
+    // Only the first failure to write a file of ours is reported; the artefacts matter more.
     void keep(const foundation::Result<void>& result) {
         if (result || hasComplained_) return;
         hasComplained_ = true;
@@ -150,7 +150,7 @@ class Run {
     bool hasComplained_ = false;
 };
 
-// Before there is a second thread. Where the paths of a list lead is not known yet.
+// Call it before there is a second thread. The paths of a list are not known yet.
 void giveUpRights(const Settings& settings, const Platform& platform, const std::string& temporary,
                   const std::optional<JUnitReport>& junit) {
     using sandbox::Access;
@@ -158,7 +158,7 @@ void giveUpRights(const Settings& settings, const Platform& platform, const std:
     sandbox::Confinement rights = confinementOfRuns(settings.operation, settings.paths, platform.directory);
     const auto access = settings.operation == kOperationStaple ? Access::write : Access::read;
     if (settings.from) rights.files.push_back({"/", access});
-    // The report gets its name in the end, and the temporary directory goes.
+    // At the end the report gets its name, and the temporary directory is removed.
     const auto writeBeside = [&](const std::string& path) {
         rights.files.push_back(
             {URL::fileURLWithPath(path).deletingLastPathComponent().path(), Access::write});
@@ -170,7 +170,7 @@ void giveUpRights(const Settings& settings, const Platform& platform, const std:
 }
 
 int runBatch(const Settings& settings, const foundation::FileDescriptor& signals) {
-    // Lines are collected an artefact: a thread without one of them has nothing to print.
+    // Lines are collected for each artefact: other threads print nothing.
     verboseLevel = settings.isVerbose ? kVerbosityVerbose : kVerbosityQuiet;
 
     auto paths = companion::PathList::open(settings.paths, settings.from, settings.isZeroTerminated);
@@ -215,10 +215,10 @@ int runBatch(const Settings& settings, const foundation::FileDescriptor& signals
 }  // namespace
 
 int main(int argc, char** argv) {
-    // A heap for each thread would be memory that grows with --jobs.
+    // With a heap for each thread, memory would grow with --jobs.
     mallopt(M_ARENA_MAX, kMostArenas);
     foundation::occupyStandardStreams();
-    // A reader that has gone away, and a file that would grow beyond the caller's limit, are failed writes.
+    // A closed pipe, and a file that would exceed the caller's limit, become failed writes.
     std::signal(SIGPIPE, SIG_IGN);
     std::signal(SIGXFSZ, SIG_IGN);
     try {

@@ -15,7 +15,7 @@ constexpr std::chrono::milliseconds kInterval{100};
 constexpr const char* kEraseLine = "\r\x1b[K";
 constexpr std::size_t kUsualColumns = 80;
 
-// Of the terminal, which may change any time.
+// The width of the terminal, which may change at any time.
 std::size_t columns() {
     winsize size{};
     if (::ioctl(STDERR_FILENO, TIOCGWINSZ, &size) != 0 || size.ws_col == 0) return kUsualColumns;
@@ -32,7 +32,7 @@ void Progress::show(std::uint64_t done, std::uint64_t failed, std::size_t inWork
     isOnScreen_ = true;
     std::string line =
         foundation::format("%llu done, %llu of them failed, %zu in work", done, failed, inWork);
-    line.resize(std::min(line.size(), columns() - 1));  // a second line would stay
+    line.resize(std::min(line.size(), columns() - 1));  // a second line could not be cleared
     errors_.write(kEraseLine + line);
 }
 

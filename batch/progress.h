@@ -1,4 +1,4 @@
-// The line on a terminal that shows how far a batch has come.
+// The progress line of a batch on a terminal.
 #pragma once
 
 #include <chrono>
@@ -19,7 +19,7 @@ class Progress {
 
     void show(std::uint64_t done, std::uint64_t failed, std::size_t inWork);
 
-    /// Takes the line away, so that another one can be printed.
+    /// Removes the line, so that another line can be printed.
     void clear();
 
   private:

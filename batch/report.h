@@ -1,4 +1,4 @@
-// What there is to say of all artefacts of a batch at the end.
+// The summary of all artefacts at the end of a batch.
 #pragma once
 
 #include <array>
@@ -15,7 +15,7 @@ using retrieval::Report;
 struct Summary {
     std::string_view operation;
     std::uint64_t total = 0;                  // reports
-    std::uint64_t resumed = 0;                // done by an earlier run, and left out
+    std::uint64_t resumed = 0;                // done by an earlier run, and skipped
     std::uint64_t duplicates = 0;             // paths of files that were named before
     std::array<std::uint64_t, 32> byCause{};  // indexed by Cause
     int exitStatus = 0;
@@ -26,7 +26,7 @@ struct Summary {
         return byCause.at(static_cast<std::size_t>(cause));
     }
 
-    /// Every report says something of its artefact.
+    /// Whether every report is a verdict on its artefact.
     bool holdsVerdictsOnly() const;
 };
 

@@ -21,10 +21,10 @@ struct Free {
 
 }  // namespace
 
-// FNV-1a over the path, whichever way it is spelled, whose low bits are then mixed with the high ones.
+// FNV-1a over the normal form of the path; then the low bits are mixed with the high bits.
 std::uint64_t partOf(std::string_view path, std::uint64_t parts) {
     std::uint64_t hash = 0xCBF29CE484222325;
-    // A value of its own: a loop over native() of a temporary would read what is gone.
+    // A named value: a loop over native() of a temporary would read freed memory.
     const std::filesystem::path normal = std::filesystem::path(path).lexically_normal();
     for (const char c : normal.native()) {
         hash ^= static_cast<unsigned char>(c);
@@ -40,7 +40,7 @@ std::string canonicalPath(const std::string& path) {
     const std::size_t slash = trimmed.rfind('/');
     const std::string name = slash == std::string::npos ? trimmed : trimmed.substr(slash + 1);
     std::string folder = slash == std::string::npos ? "." : trimmed.substr(0, slash + 1);
-    // "." and ".." are the folder's own names: it is the folder that is meant.
+    // "." and ".." mean the folder itself.
     const bool isFolder = name.empty() || name == "." || name == "..";
     const std::unique_ptr<char, Free> resolved(::realpath((isFolder ? trimmed : folder).c_str(), nullptr));
     if (!resolved) return path;
@@ -91,8 +91,8 @@ Selection::Choice Selection::choose(const std::string& path) {
     return Choice::wanted;
 }
 
-// A staple may have put another file in the place of the one that both names led to. What the second name
-// leads to is then a file of its own.
+// A staple may have replaced the file that had both names. Then the second name leads to another
+// file.
 bool Selection::isLinkToKnownFile(const std::string& path) {
     struct stat status {};
     if (::lstat(path.c_str(), &status) != 0 || !S_ISREG(status.st_mode) || status.st_nlink < 2) return false;

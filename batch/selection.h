@@ -1,4 +1,4 @@
-// Which paths of a list are worked on: those of one part of it, and each file once.
+// Selects paths from a list: the paths of one part, and each file once.
 #pragma once
 
 #include <cstdint>
@@ -10,22 +10,22 @@
 
 namespace pinwell::batch {
 
-/// The part of a list, from 1 to `parts`, that a path belongs to: the same on every host, whatever else the
-/// list holds.
+/// The part of a list, from 1 to `parts`, that a path belongs to. The same on every host, with any
+/// list.
 std::uint64_t partOf(std::string_view path, std::uint64_t parts);
 
-/// The path by which a file goes whichever way it was named: absolute, without links in the folders above it.
-/// The last component's own link is not followed.
+/// The same path for every way to name a file: absolute, without links in the folders above it. A link in the
+/// last component is not followed.
 std::string canonicalPath(const std::string& path);
 
-/// 16 bytes in the place of a text: SHA-256, cut.
+/// 16 bytes of a text's SHA-256, to replace the text.
 using TextDigest = std::pair<std::uint64_t, std::uint64_t>;
 TextDigest digestOf(std::string_view text);
 
 /// A set of texts that keeps the digest of each.
 class TextSet {
   public:
-    /// False if it was there before.
+    /// Returns false if it was already in the set.
     bool add(std::string_view text);
     std::size_t size() const noexcept { return count_; }
 
@@ -37,7 +37,7 @@ class TextSet {
     std::size_t count_ = 0;
 };
 
-/// Remembers what was named. Memory grows by some 32 bytes a path.
+/// Remembers the named paths. Memory grows by some 32 bytes for each path.
 class Selection {
   public:
     Selection(std::uint64_t part, std::uint64_t parts) : part_(part), parts_(parts) {}
@@ -51,7 +51,7 @@ class Selection {
     const std::uint64_t part_;
     const std::uint64_t parts_;
     TextSet paths_;
-    std::map<std::pair<std::uint64_t, std::uint64_t>, std::string> linked_;  // files of several names
+    std::map<std::pair<std::uint64_t, std::uint64_t>, std::string> linked_;  // files with several names
 };
 
 }  // namespace pinwell::batch

@@ -1,4 +1,4 @@
-// What a batch was asked to do.
+// The settings of a batch.
 #pragma once
 
 #include <chrono>
@@ -19,8 +19,8 @@ struct Settings {
 
     // The list.
     std::vector<std::string> paths;
-    std::optional<std::string> from;  // a file with one path a line; "-": standard input
-    bool isZeroTerminated = false;    // a zero byte ends each path of it, not a newline
+    std::optional<std::string> from;  // a file with one path on each line; "-": standard input
+    bool isZeroTerminated = false;    // a zero byte ends each of its paths, not a newline
     std::uint64_t shard = 1;          // of `shards` parts of the list, counted from 1
     std::uint64_t shards = 1;
 
@@ -33,7 +33,7 @@ struct Settings {
     std::optional<std::string> journal;
     bool keepsTemporaryFiles = false;
 
-    // What is said.
+    // Output.
     bool asJson = false;
     bool isQuiet = false;
     bool isVerbose = false;

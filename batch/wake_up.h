@@ -1,4 +1,4 @@
-// Lets a thread that waits in poll(2) know that another one has something for it.
+// Wakes a thread that waits in poll(2).
 #pragma once
 
 #include <sys/eventfd.h>
@@ -21,17 +21,17 @@ class WakeUp {
     /// From any thread.
     void raise() noexcept {
         const std::uint64_t one = 1;
-        // Fails only if the counter is full, and then the descriptor is readable already.
+        // Fails only if the counter is full; then the descriptor is already readable.
         [[maybe_unused]] const ssize_t ignored = ::write(event_.get(), &one, sizeof one);
     }
 
-    /// Forgets what was raised so far.
+    /// Resets it.
     void clear() noexcept {
         std::uint64_t count = 0;
         [[maybe_unused]] const ssize_t ignored = ::read(event_.get(), &count, sizeof count);
     }
 
-    /// Readable from when it was raised until it is cleared.
+    /// Readable from raise() to clear().
     int descriptor() const noexcept { return event_.get(); }
 
   private:

@@ -23,7 +23,7 @@ void Workers::add(std::function<void()> task, bool isUrgent) {
         try {
             threads_.emplace_back([this] { work(); });
         } catch (const std::system_error&) {
-            if (threads_.empty()) throw;  // with fewer it takes longer
+            if (threads_.empty()) throw;  // with fewer threads it only takes longer
         }
     }
     changed_.notify_one();
@@ -41,7 +41,7 @@ void Workers::work() {
         queue.pop_front();
         lock.unlock();
         task();
-        task = nullptr;  // what it holds goes before the thread waits
+        task = nullptr;  // frees its objects before the thread waits
         lock.lock();
     }
 }

@@ -10,8 +10,8 @@
 
 namespace pinwell::batch {
 
-/// Threads are started as tasks come, up to the maximum. Destruction waits for the tasks that have begun and
-/// drops the others.
+/// Starts threads on demand, up to the maximum. The destructor waits for the running tasks and drops the
+/// others.
 class Workers {
   public:
     explicit Workers(std::size_t maximum) : maximum_(maximum) {}
@@ -19,8 +19,8 @@ class Workers {
     Workers(const Workers&) = delete;
     Workers& operator=(const Workers&) = delete;
 
-    /// Queues a task; an urgent one goes before all that are not. An exception that leaves a task ends the
-    /// process. Throws std::system_error if there is no thread to be had at all.
+    /// Queues a task; urgent tasks go before all others. An exception that leaves a task ends the process.
+    /// Throws std::system_error if no thread at all can be started.
     void add(std::function<void()> task, bool isUrgent = false);
 
   private:
