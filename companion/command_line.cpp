@@ -83,7 +83,7 @@ std::string helpOf(const Program& program, const Command& command) {
 class Reader {
   public:
     Reader(const Program& program, const Command& command) : program_(program), command_(command) {
-        letters_ = ":h";  // with the colon a missing value is told from an unknown option
+        letters_ = ":h";  // the colon distinguishes a missing value from an unknown option
         for (const Option& one : command.options) {
             if (one.letter != 0) letters_ += std::string(1, one.letter) + (one.argument.empty() ? "" : ":");
             const int takes = one.argument.empty() ? no_argument : required_argument;
@@ -98,9 +98,9 @@ class Reader {
     Parsed read(int count, char** arguments) {
         Parsed parsed;
         parsed.command = &command_;
-        unsetenv("POSIXLY_CORRECT");  // with it, options behind an argument would be arguments
+        unsetenv("POSIXLY_CORRECT");  // otherwise options after an argument would be arguments
         opterr = 0;
-        optind = 0;  // glibc: begin anew
+        optind = 0;  // glibc: start again
         while (!parsed.exitStatus) {
             int index = -1;
 
@@ -144,7 +144,7 @@ class Reader {
     }
 
     int refuseUnknown(std::string_view word) {
-        // A letter within a group of them has no word of its own.
+        // A letter within a group has no separate word.
         if (!word.starts_with("--") && optopt != 0)
             return refuse(std::string("unknown option -") + static_cast<char>(optopt));
         std::string name = nameOfWord(word);
@@ -184,7 +184,7 @@ void complain(std::string_view program, std::string_view text) {
 
 std::string_view nearestWord(std::string_view word, std::span<const std::string_view> words) {
     std::string_view nearest;
-    // A third of a word may be wrong: in "-x" nothing is left to go by.
+    // At most a third of a word may differ: "-x" is too short to compare.
     std::size_t fewest = std::min(kMostEdits, (word.size() + 1) / 3) + 1;
     for (const std::string_view one : words) {
         const std::size_t edits = word.size() > 64 ? fewest : editsBetween(word, one);

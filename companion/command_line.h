@@ -1,13 +1,13 @@
-// The command lines of the companions: one table a command, from which its options are read and its help is
-// written.
+// The command lines of the companions. One table for each command defines its options and its
+// help.
 //
 //   Command staple{"staple", "PATH...", "Staples each artefact.", {
 //       {"jobs", 'j', "N", "How many at once", [&](const std::string& text) { return take(text, jobs); }}}};
 //   const Parsed parsed = parseCommand("pinwell-batch", {staple}, argc, argv);
 //   if (parsed.exitStatus) return *parsed.exitStatus;
 //
-// A line is `PROGRAM COMMAND [OPTION]... [--] ARGUMENT...`; options may stand among the arguments. What is
-// wrong is said in one line on standard error, with the nearest name that exists, and ends with 64.
+// A line is `PROGRAM COMMAND [OPTION]... [--] ARGUMENT...`; options may be among the arguments. An error is
+// one line on standard error, with the nearest existing name, and exit status 64.
 #pragma once
 
 #include <chrono>
@@ -21,21 +21,21 @@
 
 namespace pinwell::companion {
 
-/// Takes an option's value, empty for an option without one. Returns what is wrong with it, if anything, as
-/// in "is not a number".
+/// Takes an option's value, empty for an option without a value. Returns the fault of a wrong value, such as
+/// "is not a number".
 using TakeOption = std::function<std::optional<std::string>(const std::string& value)>;
 
 struct Option {
     std::string name;      // without dashes
-    char letter = 0;       // 0: it has none
-    std::string argument;  // what the help calls it; empty: the option takes none
+    char letter = 0;       // 0: none
+    std::string argument;  // its name in the help; empty: the option takes no value
     std::string help;
     TakeOption take;
 };
 
 struct Command {
     std::string name;
-    std::string arguments;  // what the help calls them
+    std::string arguments;  // their name in the help
     std::string help;       // one sentence
     std::vector<Option> options;
 };
@@ -48,29 +48,29 @@ struct Program {
 };
 
 struct Parsed {
-    /// The process is to end with it: the help was printed, or what is wrong.
+    /// The process must end with this status: the help or an error was printed.
     std::optional<int> exitStatus;
 
     const Command* command = nullptr;
     std::vector<std::string> arguments;
 };
 
-/// Reads the line. `arguments` of the result holds what is no option, byte for byte.
+/// Reads the line. `arguments` of the result holds everything except the options, byte for byte.
 Parsed parseCommand(const Program& program, int argc, char** argv);
 
 /// "PROGRAM: TEXT" on standard error, in one line, control characters escaped.
 void complain(std::string_view program, std::string_view text);
 
-/// Of these words the one that may have been meant; empty if none is near.
+/// The word most similar to `word`; empty if none is similar.
 std::string_view nearestWord(std::string_view word, std::span<const std::string_view> words);
 
-// Values. Each returns what is wrong with the text, or sets the value.
+// Values. Each sets the value, or returns the fault of the text.
 
 /// A whole number between the two bounds.
 std::optional<std::string> takeCount(const std::string& text, std::uint64_t lowest, std::uint64_t highest,
                                      std::uint64_t& value);
 
-/// Seconds, with decimals or without, up to ten years.
+/// Seconds, with or without decimals, up to ten years.
 std::optional<std::string> takeSeconds(const std::string& text, std::chrono::duration<double>& value);
 
 /// One of these words.

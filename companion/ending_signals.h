@@ -1,4 +1,4 @@
-// The signals that end a run, taken one at a time instead of ending the process.
+// The signals that end a run, read one at a time instead of ending the process.
 #pragma once
 
 #include <functional>
@@ -9,18 +9,18 @@
 
 namespace pinwell::companion {
 
-/// The exit status after a signal is this and its number.
+/// The exit status after a signal is this plus its number.
 inline constexpr int kSignalBase = 128;
 
-/// Blocks SIGHUP, SIGINT and SIGTERM in the calling thread, and so in those that it starts, and returns a
-/// descriptor from which they can be read (signalfd(2)). One that is ignored from the start, by nohup(1) for
-/// instance, stays ignored.
+/// Blocks SIGHUP, SIGINT and SIGTERM in the calling thread, and in the threads that it starts. Returns a
+/// descriptor from which they can be read (signalfd(2)). A signal ignored from the start, for example by
+/// nohup(1), stays ignored.
 foundation::FileDescriptor takeEndingSignals();
 
-/// The next signal that has come; `nullopt` if there is none.
+/// The next pending signal; `nullopt` if there is none.
 std::optional<int> nextEndingSignal(const foundation::FileDescriptor& signals);
 
-/// A thread that waits for them while the others work.
+/// A thread that waits for these signals while the others work.
 class SignalWatch {
   public:
     /// `react` is called once, on the watch's thread, for the first signal that comes.

@@ -1,4 +1,4 @@
-// What the companions print, and how: whole lines, in colour only where somebody sees it.
+// The output of the companions: whole lines, in colour only on a terminal.
 #pragma once
 
 #include <string>
@@ -11,23 +11,23 @@ enum class ColorWhen { automatic, always, never };
 /// "auto", "always" and "never", as --color has them.
 ColorWhen colorWhenNamed(std::string_view name) noexcept;
 
-/// Whether to colour what goes to this descriptor. --color has the first word, NO_COLOR and CLICOLOR_FORCE
-/// the next (https://no-color.org, https://bixense.com/clicolors/), then it is a matter of the terminal.
+/// Whether to colour the output to this descriptor. --color decides first, then NO_COLOR and CLICOLOR_FORCE
+/// (https://no-color.org, https://bixense.com/clicolors/), then whether it is a terminal.
 bool wantsColor(ColorWhen when, int descriptor);
 
-/// Standard output. A reader that has gone away is no error: what is left to say goes nowhere. For one
+/// Standard output. A closed pipe is not an error: the rest of the output is dropped. For one
 /// thread.
 class Output {
   public:
     explicit Output(int descriptor) : descriptor_(descriptor) {}
 
-    /// Writes all of the text, and waits for a reader that lags.
+    /// Writes the whole text, and waits for a slow reader.
     void write(std::string_view text);
 
-    /// Something could not be written though somebody was there to read it: a full disk, for instance.
+    /// Whether a write failed for another reason than a closed pipe, for example a full disk.
     bool hasFailed() const noexcept { return failed_; }
 
-    /// The reader has gone away.
+    /// Whether the reader has closed the pipe.
     bool isClosed() const noexcept { return closed_; }
 
   private:

@@ -1,4 +1,4 @@
-// A temporary directory of the process's own, so that what a run leaves can be removed with it.
+// A temporary directory of the process's own, so that all files of a run can be removed with it.
 #pragma once
 
 #include <string>
@@ -8,7 +8,7 @@
 namespace pinwell::companion {
 
 /// Makes a directory of mode 0700 in the user's temporary directory, and makes it the process's temporary
-/// directory ($TMPDIR). To be made before there is a second thread.
+/// directory ($TMPDIR). Make it before there is a second thread.
 class OwnTemporaryDirectory {
   public:
     /// `name` begins the directory's name.
@@ -25,13 +25,13 @@ class OwnTemporaryDirectory {
     /// Removes it with all that is in it.
     void remove();
 
-    /// Whether there is something in it.
+    /// Whether it is not empty.
     bool holdsFiles() const;
 
   private:
     explicit OwnTemporaryDirectory(std::string path) : path_(std::move(path)) {}
 
-    std::string path_;  // empty once it has been removed or moved from
+    std::string path_;  // empty after removal or a move
 };
 
 }  // namespace pinwell::companion

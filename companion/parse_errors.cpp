@@ -10,7 +10,7 @@
 namespace pinwell::companion {
 namespace {
 
-/// The command that was being read, or the program itself.
+/// The command on the line, or the program itself.
 const CLI::App& innermost(const CLI::App& app) {
     const std::vector<CLI::App*> parsed = app.get_subcommands();
     return parsed.empty() ? app : *parsed.front();
@@ -45,7 +45,7 @@ std::string unknown(std::string_view kind, const std::string& word, const std::v
            (nearest.empty() ? std::string() : "; did you mean " + std::string(nearest) + "?");
 }
 
-/// Words that nothing took. An option comes before an argument: it explains the others.
+/// Words that nothing accepted. An option comes before an argument, because it explains the others.
 std::string describeRest(const CLI::App& app) {
     const std::vector<std::string> rest = app.remaining(true);
     const CLI::App& command = innermost(app);

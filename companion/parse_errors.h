@@ -1,4 +1,4 @@
-// Command lines that CLI11 reads: what is wrong with one, in one line.
+// Describes the fault of a command line that CLI11 refused, in one line.
 #pragma once
 
 #include <string>
@@ -10,8 +10,8 @@ class ParseError;
 
 namespace pinwell::companion {
 
-/// What the library found, or, for a command or an option that does not exist, its name and the nearest one
-/// that does. Without a line end; control characters are escaped.
+/// The library's error. For an unknown command or option, its name and the nearest existing one. Without a
+/// line end; control characters are escaped.
 std::string describe(const CLI::App& app, const CLI::ParseError& error);
 
 }  // namespace pinwell::companion

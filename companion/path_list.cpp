@@ -19,8 +19,8 @@ foundation::Result<PathList> PathList::open(std::vector<std::string> paths,
                                             const std::optional<std::string>& from, bool isZeroTerminated) {
     foundation::FileDescriptor file;
     if (from) {
-        // Standard input is duplicated: what is owned here is closed in the end.
-        // A pipe that nobody writes yet is not waited for here, where no signal would end it.
+        // Standard input is duplicated, because this object closes its descriptor.
+        // Opening does not wait for a pipe's writer, because no signal would end the wait here.
         const int number = *from == "-" ? ::fcntl(STDIN_FILENO, F_DUPFD_CLOEXEC, 3)
                                         : ::open(from->c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY | O_NONBLOCK);
         if (number < 0) return foundation::Error::posix(errno, *from);
@@ -64,7 +64,7 @@ PathList::State PathList::nextOrWait(std::string& path) {
     }
 }
 
-// A whole line of what was read, or the last one, which needs no end.
+// A whole line of the buffer, or the last line, which needs no end.
 std::optional<std::string> PathList::takeLine() {
     while (begin_ < end_) {
         const auto from = buffer_.begin() + static_cast<std::ptrdiff_t>(begin_);
@@ -81,7 +81,7 @@ std::optional<std::string> PathList::takeLine() {
     return std::nullopt;
 }
 
-// `path` if something was read, or the end was.
+// Returns `path` if something was read or the end was reached.
 PathList::State PathList::fill() {
     pollfd input{file_.get(), POLLIN, 0};
     if (::poll(&input, 1, 0) == 0) return State::wait;

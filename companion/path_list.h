@@ -1,4 +1,4 @@
-// Paths or names, read as they are worked on: first those of the command line, then those of a file.
+// Paths or names, read during the work: first from the command line, then from a file.
 #pragma once
 
 #include <cstdint>
@@ -12,7 +12,7 @@
 
 namespace pinwell::companion {
 
-/// Longer ones name nothing (PATH_MAX), and are cut to this.
+/// Longer paths cannot exist (PATH_MAX), and are cut to this length.
 inline constexpr std::size_t kLongestPath = 4096;
 
 class PathList {
@@ -24,20 +24,20 @@ class PathList {
     enum class State : std::uint8_t {
         path,
         end,
-        wait,   // standard input has nothing yet: descriptor() tells when it does
-        broken  // it cannot be read any further: error()
+        wait,   // standard input has nothing yet: poll descriptor()
+        broken  // reading failed: error()
     };
 
-    /// The next path. Empty lines are passed over. Never blocks.
+    /// The next path. Empty lines are skipped. Never blocks.
     State next(std::string& path);
 
-    /// The same, but it blocks where next() returns `wait`.
+    /// The same, but blocks if next() returns `wait`.
     State nextOrWait(std::string& path);
 
-    /// Of `wait`: readable when there is more.
+    /// For `wait`: readable when there is more.
     int descriptor() const noexcept { return file_.get(); }
 
-    /// Of `broken`.
+    /// For `broken`.
     const std::optional<foundation::Error>& error() const noexcept { return error_; }
 
   private:
@@ -56,7 +56,7 @@ class PathList {
     std::size_t begin_ = 0;
     std::size_t end_ = 0;
     bool ended_ = false;
-    std::string line_;  // what there is of the next one
+    std::string line_;  // the part of the next line read so far
     std::optional<foundation::Error> error_;
 };
 
