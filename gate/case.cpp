@@ -63,7 +63,7 @@ void Case::examine() {
     if (!open()) return;
     isStapledAcceptable_ = judgeStapled();
     const bool knowsNothing = !codeHash_ && !stapled_;
-    // Without a hash and a ticket, all that is left to ask is whether there is a signature at all.
+    // Without a hash and a ticket, only one check remains: whether there is a signature at all.
     if (!judgement_.options.isShallow || knowsNothing) verifyBytes();
     if (judgement_.tickets != nullptr && codeHash_) lookInDirectory();
     if (!judgement_.options.attestation.empty() && kind_ != Kind::bundle) digestFile();
@@ -71,7 +71,7 @@ void Case::examine() {
 }
 
 bool Case::open() {
-    // A URL is made absolute with the working directory; a path is shown as it was given.
+    // A URL is made absolute with the working directory; a path is shown as given.
     const URL url = URL::fileURLWithPath(result_.path);
     verify::OpenedArtefact opened = verify::openArtefact(url, judgement_.platform);
     if (opened.file == nullptr) {
@@ -86,7 +86,7 @@ bool Case::open() {
 }
 
 bool Case::judgeStapled() {
-    // The tool goes no further with such a file, which has no hash and no ticket to it.
+    // The tool stops here: such a file has no hash and no ticket.
     if (file_->appropriateExitCode() != kExitOK) return false;
     codeHash_ = file_->cdHash();
     if (codeHash_) {
@@ -110,13 +110,13 @@ void Case::verifyBytes() {
     verify::Report report = verify::verifyArtefact({kind_, absolutePath_}, judgement_.workers);
     code_ = std::move(report.code);
     hasCode_ = true;
-    // The tool has found the hash, and these checks the code: of two openings of one path.
+    // The tool found the hash, these checks found the code: each opened the path by itself.
     if (!verify::checkOneArtefact(code_, codeHash_, result_.checks))
         atLeast(Verdict::altered, "It changed while it was read.");
     const bool isSigned = code_.isSigned || codeHash_ || stapled_;
     if (!isSigned) {
         atLeast(Verdict::unreadable, "It has no signature.");
-        // Without one there is nothing that the bytes could differ from.
+        // Without one there is nothing to compare the bytes with.
         result_.checks.cannotRead(verify::kSignature, {}, "there is no signature");
         return;
     }
@@ -136,7 +136,7 @@ void Case::verifyBytes() {
     }
 }
 
-// The same file as was verified, as long as nobody changes it meanwhile.
+// The verified file, unless somebody changes it meanwhile.
 void Case::digestFile() {
     try {
         const codesign::FileSource file(foundation::Places(), absolutePath_);
@@ -197,7 +197,7 @@ void Case::takeCurrent(foundation::ByteView bytes, const std::string& place) {
     }
 }
 
-// Whether somebody vouches for each piece of code: the ticket, or the seal of code that the ticket lists.
+// Checks that the ticket, or the seal of listed code, vouches for each piece of code.
 void Case::checkListing() {
     if (!isStapledAcceptable_ || judgement_.options.isShallow) return;
     const auto lists = [&](foundation::ByteView hash) {

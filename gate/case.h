@@ -1,4 +1,4 @@
-// One artefact on its way to a verdict: its ticket, its bytes, the ticket of today, and the policy.
+// One artefact on its way to a verdict: its ticket, its bytes, the current ticket, and the policy.
 //
 //   Case one(path, judgement);
 //   one.examine();                         // reads the artefact; on any thread
@@ -23,7 +23,7 @@
 
 namespace pinwell::gate {
 
-/// What all cases of a run share.
+/// Shared by all cases of a run.
 struct Judgement {
     const Platform& platform;
     const Options& options;
@@ -32,8 +32,8 @@ struct Judgement {
     std::int64_t now;                // seconds since 1970-01-01 00:00:00 UTC
 };
 
-/// Used by one thread at a time. Never throws for what is wrong with the artefact; throws std::bad_alloc. The
-/// tool's message functions must be silent.
+/// Used by one thread at a time. Never throws for a fault of the artefact; throws std::bad_alloc. The tool's
+/// message functions must be silent.
 class Case {
   public:
     Case(std::string path, const Judgement& judgement);
@@ -41,16 +41,16 @@ class Case {
     Case(Case&&) noexcept;
     Case& operator=(Case&&) = delete;
 
-    /// Reads all that is on disk.
+    /// Reads everything from the disk.
     void examine();
 
-    /// Whether the service's answer matters: only where the stapled ticket is acceptable, as for the tool.
+    /// Whether the service's ticket matters: only if the stapled ticket is acceptable, as in the tool.
     bool asksService() const;
     const std::string& recordName() const noexcept { return result_.recordName; }
 
     void takeFetched(const retrieval::FetchedTicket& fetched);
 
-    /// The verdict. Once, and last.
+    /// The verdict. Call it once, and last.
     Result conclude() &&;
 
   private:
@@ -72,10 +72,10 @@ class Case {
     std::string absolutePath_;
     std::optional<foundation::Data> codeHash_;
     std::optional<verify::JudgedTicket> stapled_;
-    std::optional<verify::JudgedTicket> current_;  // of the service, or of the directory
+    std::optional<verify::JudgedTicket> current_;  // from the service, or from the directory
     bool isStapledAcceptable_ = false;
     verify::VerifiedCode code_;
-    bool hasCode_ = false;  // the bytes were looked at
+    bool hasCode_ = false;  // the bytes were checked
 };
 
 }  // namespace pinwell::gate

@@ -32,7 +32,7 @@ class Tree {
 
     void visit(const std::string& path, unsigned depth) {
         std::error_code error;
-        // What the caller names may be a link; what is found below may not lead elsewhere.
+        // The caller's path may be a link; below it, links are not followed.
         const fs::file_status status = depth == 0 ? fs::status(path, error) : fs::symlink_status(path, error);
         const bool isDirectory = fs::is_directory(status);
         if (!isDirectory && !fs::is_regular_file(status)) return;

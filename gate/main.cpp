@@ -1,4 +1,4 @@
-// pinwell-gate: whether software that was received may be let in.
+// // pinwell-gate: judges whether to accept received software.
 #include <sysexits.h>
 
 #include <CLI/CLI.hpp>
@@ -38,7 +38,7 @@ void complain(std::string_view text) {
     companion::complain("pinwell-gate", text);
 }
 
-/// Policy options of the command line, over those of a file.
+/// Policy options of the command line, which override those of a file.
 struct PolicyArguments {
     std::string file;
     std::string maximumTicketAge;
@@ -126,7 +126,7 @@ void addOptions(CLI::App& app, Options& options, PolicyArguments& policy) {
         "0.");
 }
 
-/// What is read from here on is not trusted.
+/// Call it before untrusted data is read.
 void confine(const Options& options, const Platform& platform) {
     using sandbox::Access;
     keepSecurityLibrary();
@@ -137,11 +137,11 @@ void confine(const Options& options, const Platform& platform) {
             : confinementOfReading(options.paths, platform.directory);
     for (const std::string& path : options.paths) rights.files.push_back({path, Access::read});
     if (!options.ticketDirectory.empty()) rights.files.push_back({options.ticketDirectory, Access::read});
-    // What is not in force on this kernel is none of the caller's business: the verdict is the same.
+    // Missing restrictions on this kernel are not reported: the verdict is the same.
     static_cast<void>(sandbox::confine(rights));
 }
 
-/// The paths to judge. A directory of no artefacts is a result of its own.
+/// The paths to judge. A directory without artefacts is a result of its own.
 std::vector<std::string> expanded(const Options& options, const Platform& platform,
                                   std::vector<Result>& problems) {
     if (!options.isRecursive) return options.paths;
@@ -150,7 +150,7 @@ std::vector<std::string> expanded(const Options& options, const Platform& platfo
         FoundArtefacts found = findArtefacts(path, platform);
         if (found.paths.empty() && found.problem.empty() && std::filesystem::is_directory(path))
             found.problem = "There is no artefact in this directory";
-        // A path that is no directory speaks for itself.
+        // A path that is not a directory is judged itself.
         if (found.paths.empty() && found.problem.empty()) found.paths.push_back(path);
         all.insert(all.end(), found.paths.begin(), found.paths.end());
         if (found.problem.empty()) continue;
@@ -161,9 +161,9 @@ std::vector<std::string> expanded(const Options& options, const Platform& platfo
     return all;
 }
 
-/// Opens the files that the run will write, and refuses those that it is to read.
+/// Opens the output files of the run, and refuses its input files as outputs.
 int openReports(const Options& options, ReportFile& report, ReportFile& attestation) {
-    // A report in a bundle would be found to be one file too many.
+    // A report in a bundle would be an unsealed file.
     for (const std::string& path : {options.output, options.attestation}) {
         if (path.empty() || options.isRecursive) continue;
         if (const std::string* const bundle = directoryAround(path, options.paths)) {
@@ -184,7 +184,7 @@ int openReports(const Options& options, ReportFile& report, ReportFile& attestat
     return EX_OK;
 }
 
-/// Whether a file to be written is one of the artefacts, which it would replace.
+/// Whether an output file is one of the artefacts, which it would replace.
 bool isArtefact(const ReportFile& file, const std::vector<std::string>& paths) {
     const std::string* const artefact = file.amongst(paths);
     if (artefact != nullptr) complain("the report would replace " + *artefact + ", which is to be judged");
@@ -205,7 +205,7 @@ int writeReports(const Options& options, const std::vector<Result>& results, Rep
 }
 
 int gate(const Options& options) {
-    // What the tool's own functions would say is among the checks.
+    // The checks contain the messages of the tool's own functions.
     verboseLevel = kVerbosityQuiet;
     const HostPlatform host([](int) {});
     const Platform platform = host.services();
@@ -260,7 +260,7 @@ int run(int argc, char** argv) {
 
 int main(int argc, char** argv) {
     foundation::occupyStandardStreams();
-    // A reader that has gone away is a failed write.
+    // A closed pipe becomes a failed write.
     std::signal(SIGPIPE, SIG_IGN);
     try {
         return run(argc, argv);

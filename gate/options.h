@@ -1,4 +1,4 @@
-// What pinwell-gate was asked to do.
+// The options of pinwell-gate.
 #pragma once
 
 #include <cstdint>
@@ -8,11 +8,11 @@
 
 namespace pinwell::gate {
 
-/// What an artefact must satisfy beside being as it was signed.
+/// Requirements on an artefact besides being unchanged since signing.
 struct Policy {
     std::optional<std::int64_t> maximumTicketAge;  // in seconds
-    std::vector<std::string> teams;                // any of them; empty: every one
-    std::vector<std::string> identifiers;          // globs, any of them; empty: every one
+    std::vector<std::string> teams;                // one of these; empty: any
+    std::vector<std::string> identifiers;          // globs, one must match; empty: any
     bool requiresSecureTimestamp = false;
 };
 

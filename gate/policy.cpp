@@ -18,7 +18,7 @@ namespace {
 
 constexpr std::int64_t kMaximumAge = std::int64_t{10'000} * 366 * 86'400;
 
-/// How far the clocks of signer and consumer may be apart.
+/// Allowed difference between the clocks of signer and consumer, in seconds.
 constexpr std::int64_t kClockTolerance = 86'400;
 
 std::int64_t secondsIn(char unit) {
@@ -71,7 +71,7 @@ bool checkAge(std::int64_t most, const verify::JudgedTicket* ticket, std::int64_
     return isYoung;
 }
 
-/// Asks something of every slice of the artefact's own code.
+/// Checks a requirement on every slice of the artefact's own code.
 bool checkOwnCode(std::string_view name, const std::string& wanted, const verify::VerifiedCode& code,
                   const std::function<std::optional<std::string>(const CodeIdentity&)>& fault,
                   verify::Section& section) {
@@ -107,7 +107,7 @@ std::optional<std::int64_t> ageFrom(std::string_view text) {
 bool matchesGlob(std::string_view glob, std::string_view text) {
     std::size_t at = 0;
     std::size_t in = 0;
-    std::size_t star = std::string_view::npos;  // the last one, and what it has taken up to
+    std::size_t star = std::string_view::npos;  // the last one, and the end of its match
     std::size_t taken = 0;
     while (at < text.size()) {
         if (in < glob.size() && glob[in] == '*') {

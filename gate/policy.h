@@ -1,10 +1,10 @@
-// What an artefact must satisfy beside being as it was signed, and the file that says so.
+// Requirements on an artefact besides being unchanged since signing, and the policy file.
 //
-// A policy file is in TOML, with keys named as the options:
+// A policy file is in TOML; its keys are the names of the options:
 //
 //   max-ticket-age = "90d"
-//   require-team = "A1B2C3D4E5"                  or a list, of which one must be it
-//   require-identifier = "com.example.*"         or a list, of which one must match
+//   require-team = "A1B2C3D4E5"                  or a list, one of which must be equal
+//   require-identifier = "com.example.*"         or a list, one of which must match
 //   require-secure-timestamp = true
 //
 // An age is a whole number and a unit: s, m, h, d or w.
@@ -25,25 +25,25 @@ namespace pinwell::gate {
 /// Longest policy file.
 inline constexpr std::size_t kMaximumPolicyFile = std::size_t{1024} * 1024;
 
-/// What is wrong with a policy file: "FILE:LINE: what".
+/// The fault of a policy file: "FILE:LINE: fault".
 class PolicyError : public std::runtime_error {
   public:
     using std::runtime_error::runtime_error;
 };
 
-/// `nullopt` if the text is no age, or one beyond ten thousand years.
+/// `nullopt` if the text is not an age, or is beyond ten thousand years.
 std::optional<std::int64_t> ageFrom(std::string_view text);
 
-/// Whether a glob of '*', '?' and characters matches all of a text. Time is in proportion to the product of
-/// their lengths at most.
+/// Whether a glob of '*', '?' and characters matches a whole text. Time is at most in proportion to the
+/// product of their lengths.
 bool matchesGlob(std::string_view glob, std::string_view text);
 
-/// Throws PolicyError if the file cannot be read, is no TOML, or holds a key or value that is none of ours.
+/// Throws PolicyError if the file cannot be read, is not TOML, or has an unknown key or value.
 Policy readPolicyFile(const std::string& path);
 
-/// Adds a check for each thing that the policy asks. `deciding`: the ticket whose age counts; null without a
-/// genuine one. Every slice of the artefact's own code must satisfy it; nested code need not. Returns whether
-/// all passed.
+/// Adds a check for each requirement of the policy. `deciding`: the ticket whose age counts; null without a
+/// genuine ticket. Every slice of the artefact's own code must satisfy the policy; nested code need not.
+/// Returns whether all checks passed.
 bool checkAgainst(const Policy& policy, const verify::JudgedTicket* deciding,
                   const verify::VerifiedCode& code, std::int64_t now, verify::Section& section);
 

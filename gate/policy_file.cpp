@@ -1,6 +1,6 @@
-// The policy file alone: what its keys are, and where something is wrong.
+// Reads the policy file: its keys, and the lines of its faults.
 //
-// The parser is compiled in: Debian's shared library reports errors by exceptions alone.
+// The parser is compiled in: Debian's shared library reports errors only by exceptions.
 #define TOML_HEADER_ONLY 1
 #define TOML_EXCEPTIONS 0
 #include <toml++/toml.h>
@@ -19,10 +19,10 @@ using foundation::format;
 
 namespace {
 
-/// Parts of a dotted key; none of ours has two.
+/// Parts of a dotted key; our keys have only one.
 constexpr unsigned kMaximumKeyParts = 4;
 
-/// Tables inside one another have no meaning here.
+/// Nested tables have no meaning here.
 class PolicyReader {
   public:
     explicit PolicyReader(const std::string& path) : path_(path) {}
@@ -65,7 +65,7 @@ class PolicyReader {
         } else {
             for (const toml::node& one : *list) all.push_back(text(name, one));
         }
-        // An empty list would ask nothing, and look as if it did.
+        // An empty list would look like a requirement, but require nothing.
         if (all.empty()) refuse(value.source(), format("%@ must not be empty", name));
         return all;
     }

@@ -1,5 +1,5 @@
-// The results of a run as text for a person, and as documents for programs. All texts of artefacts come out
-// escaped as the format wants it, and in UTF-8.
+// The results of a run as text for a person, and as documents for programs. Texts from artefacts are escaped
+// for the format, and in UTF-8.
 #pragma once
 
 #include <string>
@@ -12,7 +12,7 @@ namespace pinwell::gate {
 
 std::string render(Format format, const std::vector<Result>& results);
 
-/// The conclusion first, then only what failed or has to be known.
+/// The conclusion first, then only failures and notes.
 std::string renderText(const std::vector<Result>& results);
 
 /// docs/gate.schema.json.
@@ -24,7 +24,7 @@ std::string renderSarif(const std::vector<Result>& results);
 /// JUnit XML: a test suite for each path, a test case for each check.
 std::string renderJUnit(const std::vector<Result>& results);
 
-/// One page with all that it needs in it, and no script.
+/// One self-contained page without scripts.
 std::string renderHtml(const std::vector<Result>& results);
 
 /// An in-toto statement with a verification summary (https://slsa.dev/verification_summary/v1), not signed:

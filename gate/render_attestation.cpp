@@ -23,12 +23,12 @@ std::string timestampOf(std::int64_t time) {
     return text + "Z";
 }
 
-/// The field takes URIs alone, so that a path is made absolute with the working directory.
+/// The field takes only URIs, so a path is made absolute with the working directory.
 std::string absoluteUriOf(const std::string& path) {
     return uriOf(foundation::URL::fileURLWithPath(path).path());
 }
 
-/// What the artefact is known by: the digest of a file, and what a ticket lists.
+/// The identity of the artefact: the digest of a file, and the hash in a ticket.
 OrderedJson subjectOf(const Result& result) {
     OrderedJson digests = OrderedJson::object();
     if (!result.fileDigest.empty()) digests["sha256"] = foundation::toHex(result.fileDigest);
@@ -82,7 +82,7 @@ std::string renderAttestation(const std::vector<Result>& results, const Options&
                                 {"verificationResult", isPassed ? "PASSED" : "FAILED"},
                                 {"verifiedLevels", std::move(levels)},
                                 {"slsaVersion", "1.0"},
-                                // Of our own: readers of summaries pass over members that they do not know.
+                                // Our own member: readers of summaries skip unknown members.
                                 {"pinwell",
                                  {{"tickets", ticketsOf(options.tickets)},
                                   {"policy", policyOf(options.policy)},

@@ -43,7 +43,7 @@ summary { cursor: pointer; margin-top: .6rem; }
 @media print { details > * { display: revert; } }
 )";
 
-/// The page loads nothing and runs nothing, whatever the names in it are.
+/// The page loads nothing and runs nothing, with any names in it.
 constexpr std::string_view kHead =
     "<!DOCTYPE html>\n<html lang=\"en\">\n<head>\n<meta charset=\"utf-8\">\n"
     "<meta name=\"viewport\" content=\"width=device-width, initial-scale=1\">\n"

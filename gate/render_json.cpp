@@ -22,7 +22,7 @@ std::string renderJson(const std::vector<Result>& results) {
                         {"checks", std::move(checks)}});
     }
     const Json document{{"version", 1}, {"results", std::move(list)}};
-    // Names of files need not be in UTF-8.
+    // File names need not be UTF-8.
     return document.dump(2, ' ', false, Json::error_handler_t::replace) + "\n";
 }
 

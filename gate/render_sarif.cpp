@@ -25,8 +25,8 @@ const char* levelOf(Outcome outcome) {
     return "note";
 }
 
-/// A text as itself in a message (SARIF 2.1.0, 3.11.5 and 3.11.6): names of files are neither placeholders
-/// nor links.
+/// Escapes a text for a message (SARIF 2.1.0, 3.11.5 and 3.11.6), so that file names are not read as
+/// placeholders or links.
 std::string literal(const std::string& text) {
     std::string escaped;
     for (const char c : text) {

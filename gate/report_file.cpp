@@ -21,7 +21,7 @@ std::string reasonOf(int code) {
     return std::generic_category().message(code);
 }
 
-/// The regular file behind a descriptor; `nullopt` if it is none.
+/// The status of a descriptor's regular file; `nullopt` for anything else.
 std::optional<struct stat> regularFile(int descriptor) {
     struct stat status {};
     if (::fstat(descriptor, &status) != 0 || !S_ISREG(status.st_mode)) return std::nullopt;
@@ -67,7 +67,7 @@ std::optional<std::string> ReportFile::write(std::string_view document) {
     companion::Output output(descriptor);
     output.write(document);
     if (output.hasFailed()) return "cannot write to " + name;
-    // Some file systems report what they could not store when the file is closed.
+    // Some file systems report a failed write only on close.
     if (!path_.empty() && ::close(file_.release()) != 0)
         return "cannot write to " + name + ": " + reasonOf(errno);
     return std::nullopt;

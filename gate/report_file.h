@@ -1,4 +1,4 @@
-// Where a document of the run goes: a file, or standard output.
+// The output of a document: a file, or standard output.
 #pragma once
 
 #include <optional>
@@ -10,26 +10,26 @@
 
 namespace pinwell::gate {
 
-/// Is opened before any artefact is read, since a confined process opens nothing more. What a file held stays
-/// until the document is there to replace it, so that a run which is interrupted, or which finds that the
-/// file is an artefact, has lost nothing.
+/// Opened before any artefact is read, because a confined process can open no more files. The old contents
+/// stay until the document replaces them. So nothing is lost if the run is interrupted, or if the file turns
+/// out to be an artefact.
 class ReportFile {
   public:
     /// Empty: standard output.
     explicit ReportFile(std::string path) : path_(std::move(path)) {}
 
-    /// Opens the file, or makes it. Returns what is wrong, if something is.
+    /// Opens or creates the file. Returns the error, if any.
     std::optional<std::string> open();
 
-    /// The first of `paths` that is this file, by any name; `nullptr` if none is. Never for devices and
-    /// pipes.
+    /// The first of `paths` that is this file, by any name; `nullptr` if none is. Always `nullptr` for
+    /// devices and pipes.
     const std::string* amongst(const std::vector<std::string>& paths) const;
 
-    /// Whether both are one file. Never for devices and pipes.
+    /// Whether both are one file. Always false for devices and pipes.
     bool isSameAs(const ReportFile& other) const;
 
-    /// Writes all of the document, in the place of what was there. A reader that has gone away is no error.
-    /// Returns what is wrong, if something is.
+    /// Replaces the contents by the document. A closed pipe is not an error. Returns the error, if
+    /// any.
     std::optional<std::string> write(std::string_view document);
 
   private:
@@ -37,7 +37,7 @@ class ReportFile {
     foundation::FileDescriptor file_;
 };
 
-/// The first of `directories` that a file at `path` would be in, directly or deeper; `nullptr` if none.
+/// The first of `directories` that would contain a file at `path`, at any depth; `nullptr` if none.
 const std::string* directoryAround(const std::string& path, const std::vector<std::string>& directories);
 
 }  // namespace pinwell::gate

@@ -11,7 +11,7 @@ namespace pinwell::gate {
 
 namespace {
 
-/// Somebody waits at the gate: one more try after half a second, and another after a second.
+/// Somebody waits for the verdict, so there are only two retries: after half a second, and after a second.
 retrieval::FetchOptions fetchOptions() {
     retrieval::FetchOptions options;
     options.retry.retries = 2;

@@ -1,4 +1,4 @@
-// A run over many paths: reading in parallel, one conversation with the record service, one verdict a path.
+// A run over many paths: parallel reading, one series of lookups, one verdict for each path.
 #pragma once
 
 #include <vector>
@@ -10,11 +10,11 @@
 
 namespace pinwell::gate {
 
-/// One result a path, in their order. `tickets` is null without --tickets.
+/// One result for each path, in their order. `tickets` is null without --tickets.
 std::vector<Result> judgeAll(const std::vector<std::string>& paths, const Options& options,
                              const TicketDirectory* tickets, const Platform& platform);
 
-/// The exit status of a run: that of the gravest verdict.
+/// The exit status of a run: the status of the gravest verdict.
 int exitStatusOf(const std::vector<Result>& results);
 
 }  // namespace pinwell::gate

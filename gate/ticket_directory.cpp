@@ -9,7 +9,7 @@ namespace pinwell::gate {
 using codesign::CodeError;
 
 TicketDirectory::TicketDirectory(const std::string& path)
-    // The slash has a link followed: the directory is the caller's word.
+    // The slash makes a link followed: the caller chose the directory.
     : path_(path), directory_(verify::OpenDirectory::atPath(path + "/")) {}
 
 TicketDirectory::Found TicketDirectory::find(const std::string& recordName) const {

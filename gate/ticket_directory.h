@@ -9,7 +9,7 @@
 
 namespace pinwell::gate {
 
-/// Longest ticket that is read, as for stapled ones.
+/// Maximum length of a ticket, as for stapled tickets.
 inline constexpr std::uint64_t kMaximumTicketFile = std::uint64_t{64} * 1024 * 1024;
 
 /// Immutable; may be used from any number of threads.
@@ -19,9 +19,9 @@ class TicketDirectory {
     explicit TicketDirectory(const std::string& path);
 
     struct Found {
-        std::string file;                        // where it is, or would be
+        std::string file;                        // its path, whether it exists or not
         std::optional<foundation::Data> ticket;  // `nullopt`: there is none
-        std::string problem;                     // why there is something that cannot be read
+        std::string problem;                     // why an existing file cannot be read
     };
     Found find(const std::string& recordName) const;
 

@@ -5,8 +5,8 @@
 
 namespace pinwell::gate {
 
-/// A path as a URI reference (RFC 3986): an absolute one as a file URL, a relative one as it is, with all
-/// that needs it in percent encoding.
+/// A path as a URI reference (RFC 3986): an absolute path as a file URL, a relative path unchanged, with
+/// percent encoding where needed.
 std::string uriOf(const std::string& path);
 
 }  // namespace pinwell::gate
