@@ -41,7 +41,7 @@ void setHash(PWHashedFile& file, Report& report) {
     report.recordName = recordNameForHash(report.codeHash->algorithm, *hash);
 }
 
-/// A record that is no valid one but was meant to be.
+/// Whether an invalid record looks like a damaged one.
 bool isDamagedRecord(const trailer_header& record) {
     const bool knownType = record.type() == kTerminatorTrailerType || record.type() == kTicketTrailerType;
     return record.magic() == kTerminatorTrailer.magic() || (record.version() == kTrailerVersion && knownType);
@@ -61,7 +61,7 @@ class TrailerWalk {
         }
     }
 
-    /// The first ticket from the end, which is the one that counts.
+    /// The first ticket from the end; only this one counts.
     const std::optional<Range>& ticket() const { return ticket_; }
 
   private:
@@ -103,7 +103,7 @@ class TrailerWalk {
     }
 
     void keep(Trailer trailer) {
-        // The tool looks no further than the ticket; what is wrong behind it is shown and no more.
+        // The tool stops at the ticket; faults beyond it are only shown.
         if (!trailer.problem.empty() && !into_.fault && !ticket_)
             into_.fault = Fault{"a trailer record is damaged (" + trailer.problem + ")", std::nullopt,
                                 trailer.recordOffset};
@@ -117,7 +117,7 @@ class TrailerWalk {
     std::optional<Range> ticket_;
 };
 
-/// The ticket's bytes within a superblob: the last one counts, as for the tool.
+/// The ticket's bytes within a superblob: the last ticket counts, as in the tool.
 std::optional<Range> ticketIn(ByteView superblob) {
     const auto blob = codesign::surveyLastBlobOf(kTicketSlotType, superblob);
     if (!blob || blob->bytes.size() < kBlobHeaderSize) return std::nullopt;
@@ -131,7 +131,7 @@ std::optional<Fault> placeFaultOf(const Place& place) {
     return std::nullopt;
 }
 
-/// The fault under which a genuine ticket is still none for the artefact.
+/// The fault of a genuine ticket that does not accept the artefact.
 std::optional<Fault> listingFaultOf(const Report& report) {
     const Payload& payload = *report.ticket->payload;
     if (report.kind == Kind::ticket || payload.matchingEntry) return std::nullopt;
@@ -229,7 +229,7 @@ void Inspector::gatherImage(const URL& url, Report& report) const {
     const bool isSet = image.dmgHeader().codeSignOffset() != 0 && image.dmgHeader().codeSignLength() != 0;
     if (isSet && image.dmgHeader().hasMagic()) {
         place.superblob = Range{image.dmgHeader().codeSignOffset(), image.dmgHeader().codeSignLength()};
-        // By the superblob as the tool has read it, so that the ticket shown is the one it judges.
+        // From the superblob that the tool has read, so that the judged ticket is shown.
         codesign::SignatureDescription table = codesign::describeSignature(image.superblob());
         place.blobs = std::move(table.blobs);
         place.blobCount = table.blobCount;
@@ -279,7 +279,7 @@ bool Inspector::gatherBareTicket(const URL& url, bool mustLookLikeOne, Report& r
 
 Report Inspector::inspect(const std::string& path) const {
     Report report;
-    // A URL is made absolute with the working directory; a path is shown as it was given.
+    // A URL is made absolute with the working directory; a path is shown as given.
     report.path = path;
     report.platformDirectory = platform_.directory.path();
     const URL url = URL::fileURLWithPath(path);
@@ -298,7 +298,7 @@ Report Inspector::inspect(const std::string& path) const {
     const std::string extension = url.pathExtension();
     switch (assessmentClassForUTI(platform_.types, properties->typeIdentifier, extension)) {
         case AssessmentClass::bundle:
-            // What is executable may be a ticket all the same.
+            // An executable file may still be a ticket.
             if (isFile && gatherBareTicket(url, true, report)) break;
             report.kind = isFile ? Kind::executable : Kind::bundle;
             gatherBundle(url, report);

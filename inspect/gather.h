@@ -1,4 +1,4 @@
-// Finding out everything about a path that bears on its ticket. Reads, and changes nothing; no network.
+// Gathers everything about a path that concerns its ticket. Only reads; no network.
 #pragma once
 
 #include <string>
@@ -15,7 +15,7 @@ class Inspector {
   public:
     explicit Inspector(const Platform& platform) : platform_(platform) {}
 
-    /// Never throws for what is wrong with the path or its contents.
+    /// Never throws for a fault of the path or its contents.
     Report inspect(const std::string& path) const;
 
   private:

@@ -15,10 +15,10 @@ namespace {
 
 using foundation::ByteView;
 
-/// Places of a damaged certificate block at which a certificate is looked for.
+/// Maximum positions in a damaged certificate block where a certificate is searched.
 constexpr std::size_t kMaximumSearches = 4096;
 
-/// No certificate is shorter; what is, is not worth a search.
+/// No certificate is shorter, so shorter ranges are not searched.
 constexpr std::size_t kShortestCertificate = 100;
 
 /// Makes faults with both offsets.
@@ -55,7 +55,7 @@ std::optional<trust::CertificateDescription> certificateAt(ByteView rest, std::s
     return description;
 }
 
-/// Every certificate in the block, wherever it stands: the framing around them may be what is damaged.
+/// Every certificate in the block, at any position: only the framing may be damaged.
 void gatherCertificates(ByteView block, Ticket& into) {
     const std::uint64_t base = into.certificateBlock->offset;
     const auto sequence = trust::der::readElement(block);
@@ -127,7 +127,7 @@ void judgeChain(ByteView bytes, const satchel_view& view, trust::TrustService& s
         into.chain.links.push_back({title == nullptr ? "" : *title, error == nullptr ? "" : *error});
     }
 
-    // Without the signer's own certificate the list begins with another, whose key says nothing.
+    // Without the signer's own certificate the list begins with another, whose key proves nothing.
     const bool signerIsReadable =
         into.unreadable.empty() || into.certificates.front().range.offset < into.unreadable.front().offset;
     const trust::PublicKeyRef key = object->copyPublicKey();

@@ -7,16 +7,16 @@
 
 namespace pinwell::inspect {
 
-/// `artefactHash`, when there is one, is looked for among the entries. Whether the ticket is acceptable is
-/// not said here.
+/// Searches the entries for `artefactHash`, if given. Does not decide whether the ticket is
+/// acceptable.
 Ticket gatherTicket(foundation::ByteView bytes, std::optional<std::uint64_t> fileOffset,
                     const std::optional<Hash>& artefactHash, trust::TrustService& service);
 
-/// Whether the bytes are meant to be a ticket, as far as that shows in damaged ones too.
+/// Whether the bytes look like a ticket, possibly a damaged one.
 bool looksLikeTicket(foundation::ByteView bytes);
 
-/// The first rule that fails, in the order in which the tool asks; nothing for a ticket that it accepts as
-/// genuine. Neither the revoked flag nor the entries count here.
+/// The first rule that fails, in the tool's order; `nullopt` for a ticket that the tool accepts as genuine.
+/// Ignores the revoked flag and the entries.
 std::optional<Fault> firstFaultOf(const Ticket& ticket);
 
 }  // namespace pinwell::inspect

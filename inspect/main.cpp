@@ -1,4 +1,4 @@
-// pinwell-inspect: shows everything about an artefact that bears on its ticket. Reads only; no network.
+// pinwell-inspect: shows everything about an artefact that concerns its ticket. Only reads; no network.
 #include <sysexits.h>
 #include <unistd.h>
 
@@ -40,8 +40,8 @@ void complain(std::string_view text) {
     companion::complain("pinwell-inspect", text);
 }
 
-/// From here on: what it was given is read, and nothing is written, started or connected to. A kernel that
-/// cannot see to that lets the run go on as it is.
+/// After this, the process only reads the given paths: it writes nothing, starts nothing and connects to
+/// nothing. On a kernel without support the run goes on without the restrictions.
 void giveUpRights(const Arguments& arguments, const Platform& platform) {
     keepSecurityLibrary();
     platform.systemLog.connect();
@@ -59,7 +59,7 @@ void limitRunaways(const Arguments& arguments) {
 }
 
 int inspectAll(const Arguments& arguments) {
-    // What the tool's own functions would say is in the report.
+    // The report contains the messages of the tool's own functions.
     verboseLevel = kVerbosityQuiet;
     const HostPlatform host([](int) {});
     limitRunaways(arguments);
@@ -119,7 +119,7 @@ int run(int argc, char** argv) {
 
 int main(int argc, char** argv) {
     foundation::occupyStandardStreams();
-    // A reader that has gone away is a failed write.
+    // A closed pipe becomes a failed write.
     std::signal(SIGPIPE, SIG_IGN);
     try {
         return run(argc, argv);

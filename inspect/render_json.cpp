@@ -21,7 +21,7 @@ Json orNull(const std::optional<T>& value) {
     return value ? Json(*value) : Json(nullptr);
 }
 
-/// A text that is empty when there is nothing to say.
+/// A text; null if it is empty.
 Json orNull(const std::string& text) {
     return text.empty() ? Json(nullptr) : Json(text);
 }

@@ -17,7 +17,7 @@ constexpr const char* kGreen = "1;32";
 constexpr const char* kRed = "1;31";
 constexpr const char* kYellow = "1;33";
 
-/// Where the values stand; labels are shorter.
+/// The column of the values; labels are shorter.
 constexpr std::size_t kValueColumn = 16;
 
 std::string padded(std::string text, std::size_t width) {
@@ -53,7 +53,7 @@ class Page {
     void plain(const std::string& text) { text_ += text + "\n"; }
     void gap() { text_ += "\n"; }
 
-    /// A labelled value; without a label, one that goes on from the line above.
+    /// A labelled value; without a label, a continuation of the line above.
     void line(const std::string& label, const std::string& value) {
         plain(padded("  " + label, kValueColumn) + value);
     }
@@ -74,7 +74,7 @@ class Page {
                                     : format(", at offset %llu of the file", *fault.fileOffset));
     }
 
-    /// A row for each element, and how many more there are of `total`.
+    /// A row for each element, and the number of further ones in `total`.
     template <class List, class Row>
     void rows(const std::string& label, const List& list, std::uint64_t total, Row row) {
         std::string shownLabel = label;
@@ -220,7 +220,7 @@ void showCertificate(std::size_t number, const Certificate& certificate, Page& p
     page.line("", format("   %s, valid %s, %s", key, valid, rangeText(certificate.range)));
     page.line("", format("   issued by %s", one.isSelfIssued ? "itself" : one.issuer));
     for (const auto& extension : one.extensions) {
-        // Markers are what this system knows certificates by; the rest is in the JSON.
+        // This system recognises certificates by their markers; the JSON has the other extensions.
         if (!extension.oid.starts_with("1.2.840.177245.")) continue;
         page.line("", format("   marker %s", extension.oid));
     }

@@ -7,11 +7,11 @@
 
 namespace pinwell::inspect {
 
-/// Entries, certificates and table rows that are shown; a line counts the rest.
+/// Maximum number of entries, certificates and table rows shown; a line counts the rest.
 inline constexpr std::size_t kMaximumRowsShown = 16;
 
-/// Several lines, the last one ended. Whatever came from a file is escaped; `colour` adds terminal colours
-/// and changes no text.
+/// Several lines, each with a line end. Texts from a file are escaped; `colour` adds terminal colours and
+/// changes no text.
 std::string renderText(const Report& report, bool colour);
 
 }  // namespace pinwell::inspect

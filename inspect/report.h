@@ -1,7 +1,7 @@
-// What was found out about one path: a plain data model, made by gather.h and shown by the two renderings.
+// The findings about one path: a plain data model, made by gather.h and shown by the two renderings.
 //
-// Texts that came from a file are as they were found, whatever is in them; a rendering escapes them. What is
-// damaged carries a fault, and what could be read in spite of it is there. Offsets count bytes.
+// Texts from a file are unchanged; a rendering escapes them. A damaged part carries a fault, and all of it
+// that could be read. Offsets count bytes.
 #pragma once
 
 #include <cstdint>
@@ -18,7 +18,7 @@ namespace pinwell::inspect {
 
 using foundation::Data;
 
-/// The most of each list that is kept; beyond it there is a count. A ticket's own limit is some 800,000.
+/// The maximum length of each list; the rest is only counted. A ticket's own limit is some 800,000.
 inline constexpr std::size_t kMaximumEntriesKept = 65'536;
 inline constexpr std::size_t kMaximumTrailersKept = 1024;
 inline constexpr std::size_t kMaximumCertificatesKept = 16;
@@ -30,7 +30,7 @@ struct Range {
     bool operator==(const Range&) const = default;
 };
 
-/// Something that is wrong: one line without a full stop.
+/// A fault: one line without a full stop.
 struct Fault {
     std::string rule;
     std::optional<std::uint64_t> offset;      // in the ticket
@@ -39,7 +39,7 @@ struct Fault {
     bool operator==(const Fault&) const = default;
 };
 
-/// A code hash with the number of its digest type; 0 when that is not known.
+/// A code hash with the number of its digest type; 0 if unknown.
 struct Hash {
     std::uint32_t algorithm = 0;
     Data bytes;
@@ -56,23 +56,23 @@ struct Item {
     std::optional<std::uint64_t> size;  // of a file
 };
 
-// Where a ticket sits.
+// The places of a ticket.
 
 /// Contents/CodeResources of a bundle, or the file itself.
 struct FilePlace {
     std::string path;
-    std::optional<Fault> fault;  // there is something, and it is no ticket file
+    std::optional<Fault> fault;  // the path exists, but is not a ticket file
 };
 
 struct SuperblobPlace {
     std::uint64_t trailerOffset = 0;
-    std::optional<Range> superblob;  // nothing when unsigned
+    std::optional<Range> superblob;  // `nullopt` if unsigned
     std::vector<codesign::BlobDescription> blobs;
     std::size_t blobCount = 0;  // as stated
     std::optional<Fault> fault;
 };
 
-/// One record behind a package's archive, the last one first.
+/// One record after a package's archive; the last one is first in the list.
 struct Trailer {
     std::uint64_t recordOffset = 0;
     std::uint16_t version = 0;
@@ -97,7 +97,7 @@ struct Certificate {
     trust::CertificateDescription description;
 };
 
-/// One certificate of the chain that was judged, leaf first, and what is wrong with it.
+/// One certificate of the judged chain, leaf first, with its faults.
 struct Link {
     std::string title;
     std::string error;
@@ -105,7 +105,7 @@ struct Link {
 
 struct Chain {
     bool trusted = false;
-    std::string reason;  // why not; names the certificate at fault
+    std::string reason;  // why not; names the faulty certificate
     std::vector<Link> links;
 };
 
@@ -113,14 +113,14 @@ enum class Signature { verifies, fails, unchecked };
 
 struct Entry {
     std::uint64_t index = 0;
-    Hash hash;  // empty when it cannot be copied out
+    Hash hash;  // empty if it cannot be copied
     bool isUsable = false;
-    bool matches = false;  // it is the artefact's
+    bool matches = false;  // it is the artefact's hash
 };
 
 struct Payload {
     Range range;             // in the ticket
-    bool hasHeader = false;  // otherwise it is too short for one, and what follows says nothing
+    bool hasHeader = false;  // false: too short; the next members have no meaning
     std::uint16_t version = 0;
     std::uint16_t hashLength = 0;
     std::uint32_t statedCount = 0;
@@ -130,7 +130,7 @@ struct Payload {
 
     std::uint64_t entryCount = 0;
     std::vector<Entry> entries;          // the first kMaximumEntriesKept
-    std::optional<Entry> matchingEntry;  // wherever it is
+    std::optional<Entry> matchingEntry;  // at any position
     std::optional<Fault> fault;
 };
 
@@ -151,28 +151,28 @@ struct Ticket {
 
     Chain chain;
     Signature signature = Signature::unchecked;
-    std::optional<Payload> payload;  // nothing when the container is too short to have one
+    std::optional<Payload> payload;  // `nullopt` if the container is too short for it
 };
 
 /// In the order of gravity: the worst of several paths decides the exit status.
 enum class Outcome {
     good,        // a genuine ticket that lists the artefact and is not marked revoked
     noTicket,    // none is stapled
-    refused,     // there is one, and it is not acceptable
+    refused,     // the ticket is not acceptable
     revoked,     // genuine, and marked as revoked
-    unreadable,  // the path cannot be read, or is nothing that carries a ticket
+    unreadable,  // the path cannot be read, or is of a kind without tickets
 };
 
 struct Report {
     std::string path;
-    std::string platformDirectory;  // where the trusted roots come from
+    std::string platformDirectory;  // the source of the trusted roots
     Kind kind = Kind::other;
     std::optional<Item> item;
 
     std::optional<codesign::CodeDescription> code;  // of bundles, executables and disk images
     std::optional<Hash> codeHash;
     bool isMadeUpHash = false;  // of an unsigned disk image
-    std::string recordName;     // what a lookup would ask for; empty without a hash
+    std::string recordName;     // the name for a lookup; empty without a hash
 
     Place place;
     std::optional<Ticket> ticket;
@@ -191,7 +191,7 @@ std::string_view kindName(Kind kind);
 std::string_view trailerTypeName(std::uint16_t type);
 /// "64-bit ARM", or the number in hexadecimal.
 std::string cpuTypeName(std::uint32_t cpuType);
-/// Seconds since the epoch as a date, for times that have four-digit years.
+/// Seconds since the epoch as a date; `nullopt` if the year has more than four digits.
 std::optional<std::string> timeText(std::uint64_t seconds);
 
 }  // namespace pinwell::inspect
