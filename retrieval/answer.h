@@ -1,4 +1,4 @@
-// What one try to get a record's ticket came to.
+// The result of one try to get a record's ticket.
 #pragma once
 
 #include <chrono>
@@ -17,18 +17,18 @@ using foundation::Error;
 
 struct Answer {
     enum class Kind : std::uint8_t {
-        answered,     // there is a response, whatever it says
-        unreachable,  // another try may cure it; there is an error, or a response without a body
+        answered,     // there is a response, with or without a ticket
+        unreachable,  // a retry may help; there is an error, or a response without a body
         untrusted,    // there is an error: the server was refused
     };
     Kind kind = Kind::unreachable;
 
-    /// As if this record alone had been asked for; there is a response if it was answered. Its request
-    /// identifier is the service's with a number of ours, so that no two answers of a process share one.
+    /// The response as if this record alone had been looked up; set if the outcome is `answered`. Its request
+    /// identifier is the service's with a number of ours, so that it is unique in the process.
     std::optional<https::HTTPResponse> response;
     Data body;
 
-    /// The file that the record names in place of a ticket; `nullopt` if it names none, or no valid URL.
+    /// The file that the record names instead of a ticket; `nullopt` if it names none, or its URL is invalid.
     struct Asset {
         https::HTTPResponse response;
         Data contents;
@@ -36,15 +36,15 @@ struct Answer {
     std::optional<Asset> asset;
 
     std::optional<Error> error;
-    bool errorIsOfAsset = false;  // the record was answered, its asset was not
+    bool errorIsOfAsset = false;  // the lookup succeeded, the asset's download failed
 
-    /// How long the service asks not to be asked.
+    /// The delay that the service asks for.
     std::optional<std::chrono::seconds> retryAfter;
 
-    /// What the server's judgement had to say, for the user.
+    /// The messages of the server's judgement, for the user.
     std::vector<std::string> messages;
 
-    /// It was answered, and the answer says that there is no ticket.
+    /// Whether the service responded that there is no ticket.
     bool hasNoTicket() const;
 };
 

@@ -19,12 +19,12 @@ namespace {
 
 using foundation::URL;
 
-// The controller would have ended the process here.
+// Thrown where the controller would end the process.
 struct RunEnded {
     int status;
 };
 
-// Sessions without a connection: what the controller asks is kept, and the answer comes from elsewhere.
+// Sessions without a connection: they keep the controller's request, and get the response from the caller.
 class KeptTask : public https::Task {
   public:
     explicit KeptTask(const https::Request& request) : canStart_(request.url.has_value()) {}
@@ -78,7 +78,7 @@ Platform withSessions(const Platform& platform, https::SessionService& sessions)
             platform.systemLog, platform.directory, [](int status) { throw RunEnded{status}; }};
 }
 
-// A download without an outcome must not pass for one that went well.
+// A download without an outcome must not look successful.
 foundation::Error missingAsset() {
     return {foundation::kURLErrorDomain, static_cast<std::int64_t>(https::URLErrorCode::unknown),
             "The large ticket was not fetched."};
@@ -101,7 +101,7 @@ Cause causeOf(int status, const Answer& answer, const PWHashedFile& file) {
     }
 }
 
-// Why a run has ended before its lookup.
+// The cause of a run that ended before its lookup.
 Cause causeWithoutLookup(int status, PWHashedFile& file) {
     switch (status) {
         case kExitNoPermission:
@@ -129,7 +129,7 @@ struct ArtefactRun::Reading {
     std::shared_ptr<PWHashedFile> file;
     std::unique_ptr<DownloadDelegate> controller;
 
-    // Of a bundle, whose hashed file does not note it.
+    // For a bundle, whose hashed file does not note it.
     std::optional<URL> executable;
     std::optional<files::ItemState> executableState;
     std::string executableText;  // its state, as a text
@@ -175,7 +175,7 @@ std::optional<Outcome> ArtefactRun::begin() {
     return guarded({kExitNoInput, Cause::notReadable}, [this] { return read(); });
 }
 
-// Among many artefacts, one that nobody has thought of must not end the others.
+// An unexpected fault of one artefact must not end the others.
 std::optional<Outcome> ArtefactRun::guarded(Outcome ifThrown,
                                             const std::function<std::optional<Outcome>()>& work) {
     try {
@@ -186,7 +186,7 @@ std::optional<Outcome> ArtefactRun::guarded(Outcome ifThrown,
     }
 }
 
-// Reads what the artefact is and its hash; nothing is judged yet.
+// Reads the artefact's kind and hash; judges nothing yet.
 std::optional<Outcome> ArtefactRun::open(const PWHashedFile::BeforeReading& beforeReading) {
     messages_.clear();
     recordName_.clear();
@@ -290,7 +290,7 @@ Outcome ArtefactRun::attachUnderLock(
     } catch (const RunEnded& ended) {
         status = ended.status;
     }
-    const Answer none;  // no service was asked
+    const Answer none;  // without a lookup
     return {status, causeOf(status, none, *controller.hashedFile())};
 }
 
@@ -312,7 +312,7 @@ std::optional<Outcome> ArtefactRun::finish(const Answer& answer) {
         } else {
             complete(answer.body, answer.response, std::nullopt);
         }
-        // Here a large ticket is to be downloaded: the controller has asked a session of its own.
+        // A large ticket must be downloaded: the controller has made a separate session for it.
         const std::shared_ptr<KeptSession> session = reading_->sessions.last();
         if (session != lookup && session->download() && answer.asset) {
             session->download()->setResponse(answer.asset->response);
@@ -335,14 +335,14 @@ std::optional<Outcome> ArtefactRun::finish(const Answer& answer) {
     }
     const PWHashedFile& file = *controller.hashedFile();
     if (operation_ == kOperationStaple && status == kExitOK) {
-        // What was read back is what is left, unless it has changed since.
+        // The read-back showed this state, unless the files have changed since.
         filesState_ = stateOfFiles();
         if (!file.isAsRead()) filesState_.clear();
     }
     return Outcome{status, causeOf(status, answer, file)};
 }
 
-// As it is now; of a bundle's executable, as it was before it was read.
+// The current state; for a bundle's executable, the state before it was read.
 std::string ArtefactRun::stateOfFiles() const {
     const std::string path = URL::fileURLWithPath(path_).path();
     if (kind_ != Kind::bundle) return stateOfFile(path);

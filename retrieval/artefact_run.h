@@ -1,13 +1,13 @@
-// One artefact taken through the controller's rules, in two halves with the lookup between them.
+// Takes one artefact through the controller's rules, in two halves with the lookup between them.
 //
 //   ArtefactRun run(path, kOperationStaple, platform);
 //   auto outcome = run.begin();
 //   if (!outcome) outcome = run.end(answerFor(run.recordName()));
 //
-// The controller judges, writes, reads back and says what it says in `pinwell`; here it neither prints nor
-// ends the process. An exception ends the run of this artefact, and no other one. A staple holds the
-// artefact's lock from before the write until after the read-back, and not while the lookup is under way:
-// many runs wait for one answer.
+// The controller judges, writes, reads back and makes the messages as in `pinwell`, but here it neither
+// prints nor ends the process. An exception ends only this artefact's run. A staple holds the artefact's lock
+// from before the write until after the read-back. It does not hold it during the lookup, because many runs
+// wait for one response.
 #pragma once
 
 #include <cstdint>
@@ -26,13 +26,13 @@
 
 namespace pinwell::retrieval {
 
-/// How an artefact ended.
+/// The result of an artefact.
 struct Outcome {
     int exitStatus = 0;
     Cause cause = Cause::worked;
 };
 
-/// What an artefact is; `none` until that is known, and for what is unsupported.
+/// The kind of an artefact; `none` if not yet known, or unsupported.
 enum class Kind : std::uint8_t { none, bundle, diskImage, package };
 
 /// "bundle", "diskImage", "package"; empty for `none`.
@@ -40,14 +40,14 @@ std::string_view nameOf(Kind kind) noexcept;
 
 Kind kindOf(const PWHashedFile& file);
 
-/// Whether it is a package with trailers and no ticket among them. The core writes the next ticket over the
-/// first bytes of such a file; here it is refused.
+/// Whether it is a package with trailers but without a ticket. The core would write a ticket over the first
+/// bytes of such a file; here the file is refused.
 bool holdsTrailersWithoutTicket(PWHashedFile& file);
 
-/// False if the text holds a zero byte: a call of the system would take what comes before it for the path.
+/// Returns false if the text holds a zero byte: a system call would use the part before it as the path.
 bool isPath(const std::string& text) noexcept;
 
-/// For one thread at a time, which may be another one for each half.
+/// For one thread at a time; the two halves may run on different threads.
 class ArtefactRun {
   public:
     /// `operation` is kOperationStaple or kOperationValidate. The platform's services must outlive the
@@ -57,33 +57,33 @@ class ArtefactRun {
     ArtefactRun(const ArtefactRun&) = delete;
     ArtefactRun& operator=(const ArtefactRun&) = delete;
 
-    /// Reads the artefact, and judges the stapled ticket of a validation. `nullopt` if a record is to be
-    /// looked up: recordName(). May be called again, and then begins anew.
+    /// Reads the artefact, and judges the stapled ticket of a validation. Returns `nullopt` if a record must
+    /// be looked up: recordName(). A second call starts again.
     std::optional<Outcome> begin();
 
     /// Goes on with the record's answer. If the artefact has changed since begin(), it is read again under
-    /// its lock; `nullopt` if another record is to be looked up then.
+    /// its lock; then returns `nullopt` if another record must be looked up.
     std::optional<Outcome> end(const Answer& answer);
 
-    /// Staples a ticket that is at hand, in place of begin() and end(): locks, reads, judges, writes and
-    /// reads back. `ticketFor` is called with the record's name; its error ends the run as notIssued if there
-    /// is no such file (ENOENT), and else as notReadable.
+    /// Staples a ticket from a file, instead of begin() and end(): locks, reads, judges, writes and reads
+    /// back. `ticketFor` is called with the record's name. Its error ENOENT ends the run as notIssued, every
+    /// other error as notReadable.
     Outcome attach(
         const std::function<foundation::Result<foundation::Data>(const std::string& recordName)>& ticketFor);
 
-    /// Empty until begin() has found a hash.
+    /// Empty before begin() has found a hash.
     const std::string& recordName() const noexcept { return recordName_; }
     Kind kind() const noexcept { return kind_; }
 
-    /// What tells the files that the outcome is of, the artefact's executable and the one that carries the
-    /// ticket, from what is there later: a text without blanks (file_state.h). As they were before they were
-    /// read, and of a staple that worked as they were left. Empty if it is not known.
+    /// The state of the artefact's executable and of the file that carries the ticket, to detect later
+    /// changes: a text without blanks (file_state.h). The state before reading; after a successful staple,
+    /// the state after writing. Empty if unknown.
     const std::string& filesState() const noexcept { return filesState_; }
 
-    /// What `pinwell` would have printed, line by line.
+    /// The lines that `pinwell` would print.
     const std::vector<std::string>& messages() const noexcept { return messages_; }
 
-    /// Forgets what was read, and keeps the answers to the questions above.
+    /// Frees the read data, and keeps the results of the functions above.
     void release();
 
   private:

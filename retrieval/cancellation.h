@@ -1,4 +1,4 @@
-// The end of calls before their time.
+// // Cancellation of running calls.
 #pragma once
 
 #include <memory>
@@ -17,11 +17,11 @@ class Cancellation {
     Cancellation(const Cancellation&) = delete;
     Cancellation& operator=(const Cancellation&) = delete;
 
-    /// Calls that run end soon, with errors; later ones end at once.
+    /// Running calls end soon, with errors; later calls end at once.
     void cancel();
     bool isCancelled() const;
 
-    /// Sleeps until then. Returns true, and maybe earlier, if it is cancelled.
+    /// Sleeps until `end`. Returns true, possibly earlier, if it is cancelled.
     bool sleepUntil(Clock::time_point end) const;
 
     class Use;

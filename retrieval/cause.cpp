@@ -36,7 +36,7 @@ constexpr std::array<Cause, kRows.size()> causesOfRows() {
 }
 constexpr auto kCauses = causesOfRows();
 
-// The later, the worse.
+// From the best to the worst.
 constexpr std::array kByWeight{
     kExitOK, -1, kExitNoHost, kExitNoInput, kExitDataError, kExitCannotCreate, kExitNoPermission};
 

@@ -51,7 +51,7 @@ void Connection::cancel() {
         cancelled_ = true;
         session = std::move(session_);
     }
-    session.reset();  // returns when the callbacks of a running task have
+    session.reset();  // waits for the callbacks of a running task
 }
 
 bool Connection::isCancelled() const {

@@ -1,4 +1,4 @@
-// One HTTPS session to the record service, used by one thread at a time and ended from any.
+// One HTTPS session to the record service. One thread at a time uses it; any thread may end it.
 #pragma once
 
 #include <memory>
@@ -15,24 +15,24 @@
 
 namespace pinwell::retrieval {
 
-/// What came of one request.
+/// The result of one request.
 struct Exchange {
     std::optional<https::HTTPResponse> response = {};
     foundation::Data body = {};
     std::optional<foundation::Error> error = {};
     bool serverWasRefused = false;
-    std::vector<std::string> messages = {};  // of the server's judgement
+    std::vector<std::string> messages = {};  // from the server's judgement
 };
 
 class Connection : public https::SessionDelegate {
   public:
     explicit Connection(const Platform& platform) : platform_(platform) {}
 
-    /// Blocks until the answer is complete or has failed, or cancels at the deadline. The request must have a
+    /// Blocks until the response is complete or has failed; cancels at the deadline. The request must have a
     /// URL.
     Exchange exchange(https::Request request, std::optional<Clock::time_point> deadline);
 
-    /// Ends a running exchange with an error, and all later ones. From any thread but the session's own.
+    /// Ends a running exchange with an error, and all later ones. From any thread except the session's own.
     void cancel();
     bool isCancelled() const;
 

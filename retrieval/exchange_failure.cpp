@@ -9,7 +9,7 @@
 namespace pinwell::retrieval {
 namespace {
 
-// Answers of a gateway, or of a service that has too much to do: they say nothing of the record.
+// Statuses of a gateway or of an overloaded service: they say nothing about the record.
 constexpr std::array kBusyStatuses{429, 502, 503, 504};
 
 }  // namespace

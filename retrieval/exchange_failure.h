@@ -1,4 +1,4 @@
-// Exchanges that brought no answer: errors, and responses that say nothing of what was asked.
+// Failed exchanges: errors, and responses that say nothing about the request.
 #pragma once
 
 #include <chrono>
@@ -9,14 +9,15 @@
 
 namespace pinwell::retrieval {
 
-/// `nullopt` if there is a response with a body, unless it is that of a gateway or of a service that has too
-/// much to do (429, 502, 503, 504). Otherwise an answer that says so; it is not `answered`.
+/// Returns `nullopt` if there is a response with a body, and its status is not one of a gateway or an
+/// overloaded service (429, 502, 503, 504). Otherwise returns the failure as an answer, which is not
+/// `answered`.
 std::optional<Answer> failureOf(const Exchange& exchange);
 
-/// Whether a response of this status asks to come back later.
+/// Whether a response of this status asks for a later retry.
 bool isBusyStatus(int status);
 
-/// How long the response asks not to be asked (RFC 9110, section 10.2.3); `nullopt` if it does not say.
+/// The delay that the response asks for (RFC 9110, section 10.2.3); `nullopt` if it names none.
 std::optional<std::chrono::seconds> retryAfterOf(const https::HTTPResponse& response);
 
 }  // namespace pinwell::retrieval

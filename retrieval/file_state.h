@@ -1,15 +1,15 @@
-// What tells a file as it was from what is at the same path later.
+// The state of a file, to detect whether it has changed later.
 #pragma once
 
 #include <string>
 
 namespace pinwell::retrieval {
 
-/// "SIZE,MODIFIED,CHANGED,INODE" of the file itself, whose link is not followed; both times are
-/// SECONDS.NANOSECONDS since the epoch. Empty if there is no such file, or it cannot be asked.
+/// "SIZE,MODIFIED,CHANGED,INODE" of the file, without following a link; both times are SECONDS.NANOSECONDS
+/// since the epoch. Empty if the file does not exist, or stat fails.
 ///
-/// Nobody can set the time of change: other contents show even if length and modification time were put back.
-/// A file that was copied, moved to another volume or unpacked again is another one.
+/// Programs cannot set the time of change. So changed contents are detected even if length and modification
+/// time were restored. A file that was copied, moved to another volume or unpacked again has another state.
 std::string stateOfFile(const std::string& path);
 
 }  // namespace pinwell::retrieval

@@ -26,7 +26,7 @@ using foundation::Value;
 
 namespace {
 
-/// A connection for one thread of a call. It goes back to the others unless it was cancelled.
+/// A connection for one thread of a call. It returns to the pool unless it was cancelled.
 class ConnectionLease {
   public:
     ConnectionLease(const Cancellation& cancellation, std::unique_ptr<Connection> connection,
@@ -49,10 +49,10 @@ class ConnectionLease {
     std::optional<Cancellation::Use> use_;
 };
 
-// With several names left, a service that has failed so often in a row is not asked for the rest of them.
+// After this many failures in a row, the remaining names are not looked up.
 constexpr unsigned kFailuresInARow = 6;
 
-// The request's identifier names the file that a ticket is kept in: a number makes each one different.
+// The request's identifier names the ticket's file: a number makes it unique.
 https::HTTPResponse withOwnIdentifier(https::HTTPResponse response) {
     static std::atomic<std::uint64_t> last = 0;
     const auto found = response.headers.find(kRequestIdentifierHeader);
@@ -73,15 +73,15 @@ Answer answerOf(const Exchange& exchange, foundation::Data body) {
     return answer;
 }
 
-// What ends a call before its time.
+// The limits that end a call early.
 struct Limits {
     const Cancellation& cancellation;
     std::optional<Clock::time_point> deadline;
 };
 
 enum class Grouping {
-    inOrder,  // one record a name, each with its name, in the order asked for
-    none,     // records, but not those
+    inOrder,  // one record for each name, with its name, in the requested order
+    none,     // other records
     unknown,  // no records
 };
 
@@ -99,7 +99,7 @@ Grouping groupingOf(const Value& document, const std::vector<std::string>& names
     return Grouping::inOrder;
 }
 
-// Where the record's asset is, if it has one in place of a ticket.
+// The request for the record's asset, if it has one instead of a ticket.
 std::optional<https::Request> assetRequest(const foundation::Data& body) {
     const auto document = foundation::parseJSON(body);
     if (!document) return std::nullopt;
@@ -139,7 +139,7 @@ class RecordService::Impl {
     }
 
   private:
-    // False if the names must be asked for one by one.
+    // Returns false if the names must be looked up one by one.
     bool lookUpGroup(const foundation::URL& url, const std::vector<std::string>& names,
                      std::vector<Answer>& answers, const Limits& limits) {
         Exchange exchange;
@@ -173,7 +173,7 @@ class RecordService::Impl {
             all, limits,
             [&](std::size_t index, Connection& connection) {
                 auto request = lookupRequest(url, lookupBody({names[index]}));
-                // A name that is not UTF-8 is no record's.
+                // A name that is not UTF-8 has no record.
                 if (!request) return std::optional<Answer>(answers[index]);
                 Exchange exchange = connection.exchange(*std::move(request), limits.deadline);
                 if (auto failure = failureOf(exchange)) {
@@ -216,7 +216,7 @@ class RecordService::Impl {
         answer.errorIsOfAsset = true;
     }
 
-    // Calls `work` for each index, on a few connections at once. It returns what went wrong on the way.
+    // Calls `work` for each index, on a few connections at once. `work` returns the failure, if any.
     void onConnections(const std::vector<std::size_t>& indices, const Limits& limits,
                        const std::function<std::optional<Answer>(std::size_t, Connection&)>& work,
                        std::vector<Answer>& answers, bool ofAssets = false) {
@@ -245,7 +245,7 @@ class RecordService::Impl {
             try {
                 others.emplace_back(takeTurns);
             } catch (const std::system_error&) {
-                break;  // with fewer it takes longer
+                break;  // with fewer threads it only takes longer
             }
         }
         if (!indices.empty()) takeTurns();

@@ -1,9 +1,9 @@
-// The record service as those see it that want many records: names in, one answer a name out.
+// Lookups of many records at the record service: takes names, returns one answer for each name.
 //
-// Up to 200 names go into one request. Where the service does not return exactly one record a name, each with
-// its name and in the order asked for, the names are asked for one by one, and so are all later ones if the
-// service answered a group with other records. Assets are fetched with their records. One call is one try;
-// trying again is the caller's business (retry_policy.h, ticket_fetch.h).
+// Up to 200 names go into one request. The service must return exactly one record for each name, each with
+// its name, in the order of the request. Otherwise the names are looked up one by one; after a response with
+// other records, all later names too. Assets are fetched with their records. One call is one try; the caller
+// retries (retry_policy.h, ticket_fetch.h).
 #pragma once
 
 #include <memory>
@@ -18,10 +18,10 @@
 
 namespace pinwell::retrieval {
 
-/// The most names of one request.
+/// The maximum number of names in one request.
 inline constexpr std::size_t kNamesPerRequest = 200;
 
-/// The most connections of one call.
+/// The maximum number of connections of one call.
 inline constexpr std::size_t kConnectionsPerCall = 4;
 
 class RecordService {
@@ -32,8 +32,9 @@ class RecordService {
     RecordService(const RecordService&) = delete;
     RecordService& operator=(const RecordService&) = delete;
 
-    /// One answer for each of at most kNamesPerRequest names, in their order. Blocks, until `deadline` if
-    /// there is one; never throws for what a server does. May be called from several threads at once.
+    /// One answer for each of at most kNamesPerRequest names, in their order. Blocks, at most until
+    /// `deadline` if given; never throws for a server's behaviour. May be called from several threads at
+    /// once.
     std::vector<Answer> lookUp(const std::vector<std::string>& names, const Cancellation& cancellation,
                                std::optional<Clock::time_point> deadline = std::nullopt);
 

@@ -18,12 +18,12 @@ Json orNull(std::string_view text) {
     return text.empty() ? Json(nullptr) : Json(text);
 }
 
-// As `pinwell` calls what it does; what it does not do goes by its own name.
+// The name of the operation in the messages of `pinwell`; operations that it lacks keep their own name.
 std::string_view actionOf(std::string_view operation) {
     return operation == "staple" || operation == "attach" ? "staple and validate" : operation;
 }
 
-// What `pinwell` says last of a run that gets that far; of others, what it would have said.
+// The last message of `pinwell` for a run that reaches it; otherwise the message that it would print.
 std::string lastWords(const Report& report) {
     const auto isNews = [](const std::string& message) { return !message.starts_with("Processing: "); };
     const auto last = std::find_if(report.messages.rbegin(), report.messages.rend(), isNews);

@@ -8,7 +8,7 @@ namespace pinwell::retrieval {
 namespace {
 
 constexpr double kLargestSpread = 0.5;
-// A server has said how long: a small part on top is enough to spread clients.
+// If the server states the delay, a small addition is enough to spread clients.
 constexpr double kSpreadOfAWish = 0.05;
 constexpr unsigned kMaximumDoublings = 16;
 

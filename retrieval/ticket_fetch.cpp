@@ -22,8 +22,8 @@ constexpr std::size_t kMostAlgorithmDigits = 10;  // of 32 bits
 struct Pending {
     std::size_t index = 0;  // of the name
     FetchedTicket result;
-    unsigned failures = 0;  // tries that came to nothing
-    unsigned polls = 0;     // answers that it is not issued yet
+    unsigned failures = 0;  // tries without a result
+    unsigned polls = 0;     // responses: not issued yet
     Clock::time_point begun;
     std::optional<Clock::time_point> notIssuedSince;
 };
@@ -52,7 +52,7 @@ void fail(FetchedTicket& result, Cause cause, int status, std::string message) {
     result.messages.push_back(std::move(message));
 }
 
-// The ticket in a record that was answered.
+// Takes the ticket from a response.
 void takeTicket(const Answer& answer, FetchedTicket& result, const Platform& platform) {
     const auto document = foundation::parseJSON(answer.body);
     std::optional<foundation::Data> ticket;
@@ -174,7 +174,7 @@ class Fetch {
         return pending;
     }
 
-    // What is due first, and names that were not asked for yet in the places that are left.
+    // Takes the due names first, then names that were not looked up yet.
     std::vector<Pending> takeDue() {
         std::vector<Pending> group;
         const auto now = Clock::now();
@@ -197,7 +197,7 @@ class Fetch {
         std::vector<std::string> names;
         for (const Pending& pending : group) names.push_back(pending.result.recordName);
         const std::vector<Answer> answers = service_.lookUp(names, cancellation_, options_.deadline);
-        const double chance = randomChance();  // one for all, so that they stay a group
+        const double chance = randomChance();  // one for all, so that the group stays together
         for (std::size_t i = 0; i < group.size(); ++i) {
             const auto due = takeAnswerOf(group[i], answers[i], chance);
             if (due)
@@ -207,7 +207,7 @@ class Fetch {
         }
     }
 
-    // When to ask again; `nullopt` if it has ended.
+    // The time of the next try; `nullopt` if it has ended.
     std::optional<Clock::time_point> takeAnswerOf(Pending& pending, const Answer& answer, double chance) {
         const auto now = Clock::now();
         takeAnswer(answer, pending.result, platform_);
@@ -239,8 +239,8 @@ class Fetch {
     Cancellation& cancellation_;
     const TakeFetched& take_;
     RecordService service_;
-    std::size_t next_ = 0;                               // of the names that were not asked for yet
-    std::multimap<Clock::time_point, Pending> waiting_;  // by when they are due
+    std::size_t next_ = 0;                               // of the names that were not looked up yet
+    std::multimap<Clock::time_point, Pending> waiting_;  // by due time
 };
 
 }  // namespace

@@ -1,5 +1,5 @@
-// Tickets by the names of their records, without any artefact: fetched online, judged, with the cause of each
-// that could not be had.
+// Fetches tickets by the names of their records, without any artefact. Each is judged; a missing one has its
+// cause.
 //
 //   const HostPlatform host(...);
 //   for (const FetchedTicket& one : fetchTickets({"2/2/0a1b..."}, {}, host.services()))
@@ -23,17 +23,17 @@ namespace pinwell::retrieval {
 struct FetchOptions {
     RetryPolicy retry;
 
-    /// How long to go on asking for what is not issued yet. Counts from the first answer that says so.
+    /// How long to poll for a ticket that is not issued yet. Counts from the first such response.
     std::chrono::duration<double> wait{0};
 
-    /// When all must be over; what is not, is timedOut.
+    /// The end of all; unfinished tickets are timedOut.
     std::optional<Clock::time_point> deadline;
 };
 
 struct FetchedTicket {
     std::string recordName;
     Cause cause = Cause::unreachable;
-    int exitStatus = 0;     // as `pinwell` would have ended
+    int exitStatus = 0;     // the exit status of `pinwell`
     unsigned attempts = 0;  // lookups that named the record
     double seconds = 0;     // from the first lookup to the end
 
@@ -41,20 +41,20 @@ struct FetchedTicket {
     /// marking the software as revoked (revoked). Empty otherwise.
     foundation::Data ticket;
 
-    /// For the user: why there is none.
+    /// For the user: why there is no ticket.
     std::vector<std::string> messages;
 };
 
 /// The hash in the name of a record: "2/ALGORITHM/HEX" or "1/HEX", the digits in lower case, 20 to 64 bytes
-/// of hash. `nullopt` if it is no such name.
+/// of hash. `nullopt` for any other name.
 std::optional<foundation::Data> hashInRecordName(std::string_view name);
 
-/// Gets each ticket as it ends, with the index of its name.
+/// Gets each finished ticket, with the index of its name.
 using TakeFetched = std::function<void(std::size_t index, FetchedTicket ticket)>;
 
-/// Fetches these tickets and hands each one out as it ends, on the calling thread. Blocks. A name that is
-/// none of a record ends as notIssued without being asked for. `cancellation` ends all that is not done, as
-/// `interrupted`; the deadline does so as `timedOut`.
+/// Fetches these tickets and passes on each one when it ends, on the calling thread. Blocks. An invalid name
+/// ends as notIssued without a lookup. `cancellation` ends all unfinished tickets as `interrupted`, the
+/// deadline as `timedOut`.
 void fetchTickets(const std::vector<std::string>& names, const FetchOptions& options,
                   const Platform& platform, Cancellation& cancellation, const TakeFetched& take);
 

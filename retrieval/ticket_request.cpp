@@ -27,12 +27,12 @@ using https::URLErrorCode;
 constexpr std::string_view kPath = "/v1/tickets";
 constexpr std::array<std::string_view, 3> kActions{"issued", "reissued", "reinstated"};
 constexpr std::size_t kEventDigits = 64;
-constexpr std::size_t kShownDetail = 500;  // bytes of what a service says of its own
+constexpr std::size_t kShownDetail = 500;  // bytes of a service's own text
 
 constexpr int kStatusRequestTimeout = 408;
 constexpr int kStatusConflict = 409;
 
-// Another try may find the way, or the service at its place.
+// A retry may reach the service after these failures.
 constexpr std::array kLosses{URLErrorCode::cannotFindHost, URLErrorCode::cannotConnect,
                              URLErrorCode::timedOut, URLErrorCode::connectionLost, URLErrorCode::proxyFailed};
 
@@ -65,8 +65,8 @@ foundation::Result<foundation::Data> bodyOf(const TicketWish& wish) {
     return foundation::serializeJSON(Value(std::move(body)));
 }
 
-// Says nothing of the request. One that came of its contents alone would bring yesterday's ticket when a
-// record has been revoked since.
+// Independent of the request's contents. A key made from the contents would return an old ticket after the
+// record was revoked.
 std::string newKey() {
     std::random_device source;
     foundation::Data bytes;
@@ -100,14 +100,15 @@ const std::string* textIn(const Value& document, std::string_view key) {
     return document.dictionary() != nullptr ? document[key].string() : nullptr;
 }
 
-// A part of a text that ends between two characters.
+// The beginning of a text, cut between two characters.
 std::string cutTo(std::size_t length, const std::string& text) {
     if (text.size() <= length) return text;
     while (length > 0 && (static_cast<unsigned char>(text[length]) & 0xC0U) == 0x80U) --length;
     return text.substr(0, length) + "...";
 }
 
-// What the service says is wrong, with its status; a body that is no problem says nothing.
+// The service's description of the problem, with its status; only the status if the body is not a problem
+// document.
 std::string problemIn(const Exchange& exchange) {
     std::string text = foundation::format("%d (%@)", exchange.response->status,
                                           https::localizedStringForStatusCode(exchange.response->status));

@@ -6,8 +6,8 @@
 //        {"record":"2/2/...","action":"issued","ticket":BASE64,"event":SHA-256 in hexadecimal,...}
 //     -> another status, application/problem+json (RFC 9457); "detail" is shown to the user
 //
-// The service is not believed: a ticket is judged as one that was fetched, and must list every hash that was
-// asked for.
+// The service is not trusted: its ticket is judged like a fetched one, and must list every requested
+// hash.
 #pragma once
 
 #include <optional>
@@ -25,49 +25,49 @@
 
 namespace pinwell::retrieval {
 
-/// One artefact that a ticket is wanted for.
+/// A wish for a ticket for one artefact.
 struct TicketWish {
-    std::vector<CodeHash> hashes;  // that the ticket is to list, the artefact's own first; never empty
-    std::string label;             // what it is, for people; in UTF-8
+    std::vector<CodeHash> hashes;  // for the ticket to list, the artefact's own first; never empty
+    std::string label;             // its name for people; in UTF-8
     bool reinstates = false;       // even if the record is revoked
     std::string comment{};         // for the service's log; in UTF-8
 };
 
 struct RequestOptions {
-    foundation::URL service;  // "https://HOST:PORT", maybe with a path in front of the listener's
+    foundation::URL service;  // "https://HOST:PORT", maybe with a path before the listener's
     RetryPolicy retry;
 
-    /// When all must be over; what is not, is timedOut.
+    /// The end of all; unfinished wishes are timedOut.
     std::optional<Clock::time_point> deadline;
 };
 
 struct RequestedTicket {
-    /// The ticket and its judgement. Refusals of the service are notIssued, one about a revoked record is
+    /// The ticket and its judgement. A refusal of the service is notIssued; for a revoked record it is
     /// revoked.
     FetchedTicket fetched;
 
-    /// What the service did, as its log has it; empty without a ticket.
+    /// The service's action, as in its log; empty without a ticket.
     std::string action;  // "issued", "reissued" or "reinstated"
     std::string event;   // the hash of the log's entry, in hexadecimal
 };
 
-/// The URL that tickets are asked for at. `nullopt` if the text is no https URL, names a user, or has a query
-/// or a fragment.
+/// The URL of the service. `nullopt` if the text is not an https URL, names a user, or has a query or a
+/// fragment.
 std::optional<foundation::URL> serviceURLOf(std::string_view text);
 
 /// For one thread.
 class TicketRequests {
   public:
-    /// The platform's sessions are those that show the client's certificate; they must not follow redirects.
+    /// The platform's sessions must send the client's certificate, and must not follow redirects.
     TicketRequests(const Platform& platform, RequestOptions options, Cancellation& cancellation);
 
-    /// Blocks, and tries again what another try may cure: lost connections, 429, 502, 503 and 504. The tries
-    /// for one wish have one Idempotency-Key, so that the service carries it out once. No two wishes have
-    /// the same key, in this process or another. After a service that was not reached with all tries, or not
-    /// trusted, later wishes end so without being asked for.
+    /// Blocks, and retries after lost connections, 429, 502, 503 and 504. The tries for one wish have one
+    /// Idempotency-Key, so that the service carries it out once. No two wishes have the same key, in any
+    /// process. If the service is unreachable after all tries, or not trusted, later wishes end the same way
+    /// without a request.
     RequestedTicket request(const TicketWish& wish);
 
-    /// Why no wish is asked for any more: timedOut or interrupted. `nullopt` if the time is not up.
+    /// Why no more wishes are sent: timedOut or interrupted. `nullopt` if they still are.
     std::optional<Cause> end() const;
 
   private:
@@ -84,7 +84,7 @@ class TicketRequests {
     Cancellation& cancellation_;
     Connection connection_;
     Cancellation::Use use_;
-    std::optional<FetchedTicket> lost_;  // what was said of the service when it was given up
+    std::optional<FetchedTicket> lost_;  // the failure after which the service was given up
 };
 
 }  // namespace pinwell::retrieval
