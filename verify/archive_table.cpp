@@ -15,7 +15,7 @@ using codesign::refuse;
 
 namespace {
 
-/// Longest text that is kept: digests in hexadecimal are up to 128 characters.
+/// Longest kept text: digests in hexadecimal have up to 128 characters.
 constexpr std::size_t kMaximumText = kMaximumArchivedName;
 
 std::string_view trimmed(std::string_view text) {
@@ -66,7 +66,7 @@ std::optional<Algorithm> algorithmNamed(std::string_view style) {
     return std::nullopt;
 }
 
-/// What an element with a place in the heap says of it. A second word on one thing makes it none.
+/// The fields of an element with a place in the heap. A repeated field makes it ambiguous.
 struct Described {
     std::optional<std::uint64_t> offset;
     std::optional<std::uint64_t> length;
@@ -78,7 +78,7 @@ struct Described {
     template <class T>
     void set(std::optional<T>& where, std::optional<T> value) {
         saysAnything = true;
-        // What cannot be read is as if it had been said twice.
+        // An unreadable field counts like a repeated one.
         isAmbiguous = isAmbiguous || where || !value;
         where = std::move(value);
     }
@@ -183,7 +183,7 @@ class ArchiveTableReader::Document final : public foundation::XMLEvents {
 
     void text(std::string_view piece) override {
         const std::size_t room = kMaximumText - std::min(text_.size(), kMaximumText);
-        // A longer number or digest is none; a longer name is shown cut.
+        // A longer number or digest is invalid; a longer name is shown cut.
         text_.append(piece.substr(0, room));
     }
 

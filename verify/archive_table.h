@@ -1,17 +1,18 @@
-// The table of contents of a package archive, as deep verification reads it: everything that has bytes in the
-// heap, with the digest that the table states of them. (xar/table_of_contents.h reads the rest.)
+// The table of contents of a package archive, for deep verification: everything that has bytes in the heap,
+// with the digest that the table states for them. (xar/table_of_contents.h reads the rest.)
 //
 //   <xar><toc>
 //     <checksum style="sha1"><offset>0</offset><size>20</size></checksum>
 //     <signature style="CMS"><offset>20</offset><size>1732</size>...</signature>
 //     <file id="1"><name>Payload</name>
-//       <data><length>512</length><offset>1752</offset><archived-checksum
-//       style="sha1">0a1b...</archived-checksum>... <ea id="0">... the same ...</ea> <file id="2">...</file>
+//       <data><length>512</length><offset>1752</offset>
+//         <archived-checksum style="sha1">0a1b...</archived-checksum>...</data>
+//       <ea id="0">... the same ...</ea> <file id="2">...</file>
 //     </file>
 //   </toc></xar>
 //
-// Offsets count from the start of the heap. `length` is what the heap holds; `size`, in `data`, is what comes
-// out of it, and is not looked at. A number is decimal digits alone, between white space.
+// Offsets count from the start of the heap. `length` is the length in the heap. `size`, in `data`, is the
+// unpacked length, and is ignored. A number is only decimal digits, between white space.
 #pragma once
 
 #include <cstdint>
@@ -25,24 +26,24 @@
 
 namespace pinwell::verify {
 
-/// Elements with data in the heap, and files around them. A table of 64 MiB has room for some hundred
+/// Elements with data in the heap, and files around them. A table of 64 MiB can hold some hundred
 /// thousand.
 inline constexpr std::size_t kMaximumArchivedFiles = std::size_t{1} << 20U;
 
-/// Elements inside one another.
+/// Depth of nested elements.
 inline constexpr std::size_t kMaximumTableDepth = 64;
 
-/// Most of a name that is kept, in bytes.
+/// Longest kept part of a name, in bytes.
 inline constexpr std::size_t kMaximumArchivedName = 1024;
 
-/// One range of the heap, and what it must hold.
+/// One range of the heap, and its required digest.
 struct ArchivedData {
-    std::size_t file = 0;  // index of the file that it belongs to
+    std::size_t file = 0;  // index of its file
     bool isAttribute = false;
     codesign::FileRange range;
     std::optional<Algorithm> algorithm;
     Data checksum;
-    std::string problem;  // why it cannot be held against anything; empty when it can
+    std::string problem;  // why it cannot be checked; empty if it can
 };
 
 struct ArchiveSignature {
@@ -74,10 +75,10 @@ class ArchiveTableReader {
     ArchiveTableReader(const ArchiveTableReader&) = delete;
     ArchiveTableReader& operator=(const ArchiveTableReader&) = delete;
 
-    /// Throws codesign::CodeError if it is refused; then no more must be fed.
+    /// Throws codesign::CodeError if the table is refused; then feed no more.
     void feed(ByteView bytes);
 
-    /// Once, and last. Throws as feed().
+    /// Call it once, and last. Throws like feed().
     ArchiveTable finish();
 
   private:

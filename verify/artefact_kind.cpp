@@ -28,7 +28,7 @@ bool isExecutableImage(const std::string& path) {
     }
 }
 
-/// The kind that the tool sees; `nullopt` for what it does not take, or takes for want of a better one.
+/// The tool's kind; `nullopt` for a path that it refuses, or accepts only as a fallback.
 std::optional<Kind> kindOf(const PWHashedFile& file, bool isFile, const std::string& path) {
     if (dynamic_cast<const PWHashedDiskImage*>(&file) != nullptr && isFile) return Kind::diskImage;
     if (dynamic_cast<const PWHashedFlatPackage*>(&file) != nullptr && isFile) return Kind::package;

@@ -1,4 +1,4 @@
-// Which kind of artefact a hashed file is, for those who look at its bytes.
+// The kind of artefact of a hashed file, for checks of its bytes.
 #pragma once
 
 #include <memory>
@@ -15,16 +15,16 @@ namespace pinwell::verify {
 /// "bundle", "executable", "diskImage", "package".
 std::string_view nameOf(Kind kind);
 
-/// An artefact that was opened, or why it was not. `file` is null if the path cannot be read or is of no kind
-/// that carries a ticket: `problem` is a sentence that says which.
+/// An opened artefact, or the reason why it was not opened. `file` is null if the path cannot be read or is
+/// of a kind without tickets: the sentence in `problem` says which.
 struct OpenedArtefact {
     std::shared_ptr<PWHashedFile> file;
     Kind kind = Kind::bundle;
     std::string problem;
 };
 
-/// Opens what is at `url` as the tool does, once it is known that it can be read: a file of a kind that is
-/// a directory's, or an executable file that is no executable image, is of no kind. The tool's message
+/// Opens the artefact at `url` like the tool, after checking that it can be read. It has no kind if it is a
+/// file of a directory's kind, or an executable file that is not an executable image. The tool's message
 /// functions must be silent.
 OpenedArtefact openArtefact(const foundation::URL& url, const Platform& platform);
 

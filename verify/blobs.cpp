@@ -1,4 +1,4 @@
-// What deep verification asks of a superblob as a whole (signature_parts.h), whatever its blobs say.
+// The checks of a superblob as a whole (signature_parts.h), independent of its blobs' contents.
 #include <algorithm>
 
 #include "codesign/disk_image_trailer.h"
@@ -17,7 +17,7 @@ namespace {
 constexpr std::uint32_t kRequirementsMagic = 0xFADE0C01;
 constexpr std::uint32_t kFirstSlotOfNoComponent = 0x1000;
 
-/// The magic that a blob of this slot has; `nullopt` if any may be there, because a digest covers it.
+/// The magic that a blob of this slot has; `nullopt` if any is allowed, because a digest covers it.
 std::optional<std::uint32_t> magicOf(std::uint32_t slot) {
     if (slot == codesign::kSlotCodeDirectory || codesign::isAlternateSlot(slot))
         return codesign::kCodeDirectoryMagic;

@@ -38,7 +38,7 @@ constexpr std::uint32_t kComment = 0x7FFFFFFE;
 constexpr std::uint32_t kEnd = 0xFFFFFFFF;
 constexpr std::size_t kPieceSize = std::size_t{64} * 1024;
 
-/// CRC-32 of bytes that are put together from parts.
+/// CRC-32 of concatenated parts.
 struct Checksum {
     std::uint32_t value = 0;
     std::uint64_t length = 0;
@@ -55,7 +55,7 @@ struct Checksum {
     }
 };
 
-/// Of zeros, by powers of two.
+/// The checksum of zeros, by powers of two.
 Checksum checksumOfZeros(std::uint64_t length) {
     constexpr std::size_t kPowers = 64;
     static const auto powers = [] {
@@ -114,7 +114,7 @@ struct Table {
     bool isReadable = true;
 };
 
-/// Reads the tables, and bounds what is to be unpacked.
+/// Reads the tables, and bounds the bytes to unpack.
 class TableReader {
   public:
     TableReader(FileRange dataFork, std::uint64_t limit) : dataFork_(dataFork), limit_(limit) {}
@@ -134,7 +134,7 @@ class TableReader {
         return blocks_ <= kMaximumBlocks && packed_ <= kMaximumUnpacked && unpacked_ <= kMaximumUnpacked;
     }
 
-    /// Whether blocks have more bytes than there are, so that some bytes would be unpacked many times.
+    /// Whether the blocks have more bytes than the file, so that some would be unpacked several times.
     bool sharesBytes() const { return packed_ > dataFork_.length; }
 
   private:
@@ -160,7 +160,7 @@ class TableReader {
             table.fault = format("blocks of %llu sectors, where it states %llu", next, sectors);
     }
 
-    /// True if it was the last one.
+    /// Returns true for the last block.
     bool readBlock(ByteReader& reader, std::uint64_t base, std::uint64_t& next, Table& table) {
         Block block;
         block.type = reader.be32("block type");

@@ -1,8 +1,8 @@
-// The checksums that a disk image has of itself: a second opinion on its data, beside the hashes of its
-// signature. All integers are big-endian; a sector is 512 bytes.
+// A disk image's own checksums: a second check of its data, besides the hashes of its signature. All integers
+// are big-endian; a sector is 512 bytes.
 //
-// The trailer (src/PWHashedFile/udif_header.h) says where the data fork is, with a checksum of its bytes, and
-// where a property list is whose resource-fork/blkx holds the tables:
+// The trailer (src/PWHashedFile/udif_header.h) gives the place of the data fork, with a checksum of its
+// bytes, and the place of a property list. The list's resource-fork/blkx holds the tables:
 //
 // | Offset | Size | Field of a table                                                                |
 // |--------|------|---------------------------------------------------------------------------------|
@@ -21,11 +21,11 @@
 // | 80000005   | a zlib stream                                                                             |
 // | 7FFFFFFE   | a comment                                                                                 |
 // | FFFFFFFF   | the end                                                                                   |
-// | any other  | packed in a way that is not read: the table is skipped                                    |
+// | any other  | an unsupported packing: the table is skipped                                              |
 //
-// Checksums of type 2 with 32 bits are CRC-32; others are skipped. The master checksum is that of the tables'
-// values, one after the other. What is skipped is said with its reason: only a checksum that differs, or a
-// table that contradicts itself, is a fault.
+// Checksums of type 2 with 32 bits are CRC-32; others are skipped. The master checksum covers the tables'
+// values, one after the other. A skipped table or checksum is reported with its reason. Only a wrong
+// checksum, or a table that contradicts itself, is a fault.
 #pragma once
 
 #include "codesign/disk_image_trailer.h"
@@ -34,13 +34,13 @@
 
 namespace pinwell::verify {
 
-/// Beyond it, in bytes that go in or come out, an image has no second opinion: its hashes cover every byte.
+/// A larger image, in packed or unpacked bytes, gets no second check: its hashes cover every byte.
 inline constexpr std::uint64_t kMaximumUnpacked = std::uint64_t{256} * 1024 * 1024;
 
 /// Blocks of all tables. An image of kMaximumUnpacked has about a thousand.
 inline constexpr std::size_t kMaximumBlocks = 16'384;
 
-/// Adds a check for each checksum. Memory: the property list, and one buffer a thread. Throws
+/// Adds a check for each checksum. Memory: the property list, and one buffer for each thread. Throws
 /// codesign::CodeError if the bytes cannot be read.
 void checkBlockTables(const codesign::ByteSource& source, const codesign::DiskImageTrailer& trailer,
                       Workers& workers, Section& section);

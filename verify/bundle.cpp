@@ -24,7 +24,7 @@ namespace {
 /// A property list, or a seal. Longer ones are refused.
 constexpr std::uint64_t kMaximumComponent = foundation::kMaximumPropertyListSize;
 
-/// What `read` returns of the file; `nullopt` if there is no such file.
+/// The result of `read`; `nullopt` if the file does not exist.
 template <class Read>
 auto readIfThere(const DirectoryRef& root, const std::string& path, Read read)
     -> std::optional<decltype(read(*root->fileAt(path)))> {
@@ -54,7 +54,7 @@ const Data* addressOf(const std::optional<Data>& data) {
     return data ? &*data : nullptr;
 }
 
-/// The executable of a bundle that is no executable image, with its signature in files of its own.
+/// Verifies a bundle's executable that is not an executable image, with its signature in separate files.
 VerifiedCode verifySeparately(const codesign::ByteSource& executable, const BundleLayout& layout,
                               const OutsideComponents& outside, const std::string& place, Workers& workers,
                               Section& section) {
@@ -88,7 +88,7 @@ void checkExecuteBit(const OpenFile& file, const std::string& place, Section& se
     try {
         if (codesign::isExecutableImage(file) && !isProgram(file)) return;
     } catch (const CodeError&) {
-        // The image is damaged, which its own checks say.
+        // The image is damaged; its own checks report that.
     } catch (const foundation::ShortRead&) {
     }
     section.fail(kBundleStructure, place, "a program that may be executed", "a file without an execute bit");

@@ -12,8 +12,8 @@ namespace {
 const std::string kInformation = "Info.plist";
 const std::string kResources = "Resources";
 
-// An entry of any kind: a link in the list's place is followed by whoever runs the software, and is a fault
-// here, not a reason to look for the list elsewhere.
+// An entry of any kind. The system that runs the software follows a link here, so a link is a fault, not a
+// reason to search for the list elsewhere.
 std::string propertyListOf(const BundleLayout& layout) {
     switch (layout.kind) {
         case BundleLayout::Kind::application:
@@ -46,7 +46,7 @@ BundleLayout layoutOfBundle(const std::string& path) {
         const std::string current = layout.bundle->directory("Versions")->linkTarget("Current");
         layout.rootPath = "Versions/" + current;
         layout.executable = executable.substr(versions.size());
-        // A name alone: directory() refuses any other.
+        // A single name: directory() refuses any other.
         layout.root = layout.bundle->directory("Versions")->directory(current);
     } else if (executable.starts_with(contents)) {
         layout.rootPath = "Contents";

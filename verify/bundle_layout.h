@@ -1,5 +1,5 @@
-// Where the parts of a bundle are. The main executable is found by foundation::mainExecutableOfBundle, which
-// is what the ticketed hash is found by; the rest follows from where it is.
+// The places of a bundle's parts. foundation::mainExecutableOfBundle finds the main executable, as for the
+// ticketed hash; the other places follow from it.
 //
 // | Layout      | Root of the seal    | Property list                      | Executable               |
 // |-------------|---------------------|------------------------------------|--------------------------|
@@ -7,8 +7,8 @@
 // | framework   | Versions/NAME       | Versions/NAME/Resources/Info.plist | in the root              |
 // | flat        | the bundle          | Info.plist, or Resources/Info.plist | in the root              |
 //
-// NAME is what the link Versions/Current says, one name. The seal is _CodeSignature/CodeResources below the
-// root of the seal, and what it lists is named from there.
+// NAME is the target of the link Versions/Current: a single name. The seal is _CodeSignature/CodeResources
+// below the root of the seal; its paths are relative to that root.
 #pragma once
 
 #include <optional>
@@ -24,10 +24,10 @@ struct BundleLayout {
     Kind kind = Kind::application;
     DirectoryRef bundle;
     DirectoryRef root;       // of the seal
-    std::string rootPath;    // of it, below the bundle; empty if it is the bundle
+    std::string rootPath;    // of `root`, below the bundle; empty if it is the bundle
     std::string executable;  // path below the root of the seal
     std::string
-        propertyList;  // where it must be, below the root of the seal; empty if a flat bundle has none
+        propertyList;  // its required place, below the root of the seal; empty if a flat bundle has none
 };
 
 /// Throws codesign::CodeError: kStaticCodeNotFound if the directory has no main executable.
@@ -37,7 +37,7 @@ inline const std::string kSignatureDirectory = "_CodeSignature";
 inline const std::string kSealFile = "CodeResources";
 inline const std::string kTicketFile = "CodeResources";
 
-/// Two paths with a slash between, unless one is empty.
+/// Two paths joined by a slash, unless one is empty.
 inline std::string joined(const std::string& a, const std::string& b) {
     return a.empty() || b.empty() ? a + b : a + "/" + b;
 }

@@ -22,7 +22,7 @@ namespace {
 
 const std::string kCompatibilityTarget = kSignatureDirectory + "/" + kSealFile;
 
-/// The files of the separate form, and what older signers left there.
+/// The files of the separate form, and files of older signers.
 constexpr std::array<std::string_view, 4> kSignatureFiles{"CodeDirectory", "CodeRequirements",
                                                           "CodeSignature", "CodeEntitlements"};
 
@@ -40,7 +40,7 @@ const char* kindName(EntryKind kind) {
     return "something special";
 }
 
-/// A depth for as long as it is walked.
+/// Counts a level of depth during its walk.
 class Descent {
   public:
     explicit Descent(WalkState& state) : state_(state) {
@@ -96,7 +96,7 @@ void BundleWalk::run() {
         section_.pass(kUnsealed, rootPlace_, "nothing that neither the seal nor a rule names");
 }
 
-// What is in the bundle and outside of the seal's root.
+// Checks the entries of the bundle outside of the seal's root.
 void BundleWalk::checkAround() {
     if (layout_.kind == BundleLayout::Kind::flat) return;
     if (layout_.kind == BundleLayout::Kind::framework) return checkFrameworkAround();
@@ -133,7 +133,7 @@ void BundleWalk::checkFrameworkAround() {
 void BundleWalk::walk(const DirectoryRef& directory, const std::string& relative) {
     const Descent descent(state_);
     const std::vector<Entry> entries = entriesOf(directory);
-    // The seal knows no directories, so that an empty one was either signed with the rest or added.
+    // The seal lists no directories, so an empty one may have been added after signing.
     if (entries.empty())
         emptyDirectories_.add(Outcome::noted, placeOf(relative), "a directory that holds something",
                               "an empty directory, which no seal can list");
@@ -147,7 +147,7 @@ void BundleWalk::visit(const DirectoryRef& directory, const Entry& entry, const 
     visitUnsealed(directory, entry, relative);
 }
 
-// What something other than the seal covers.
+// Handles entries that something other than the seal covers.
 bool BundleWalk::visitSpecial(const DirectoryRef& directory, const Entry& entry,
                               const std::string& relative) {
     if (relative == layout_.executable) return true;
@@ -157,7 +157,7 @@ bool BundleWalk::visitSpecial(const DirectoryRef& directory, const Entry& entry,
     }
     if (relative == kTicketFile && entry.kind == EntryKind::file &&
         layout_.kind == BundleLayout::Kind::application) {
-        // Who verifies the artefact judges its ticket, and has no use for any other.
+        // Only the artefact's own ticket is judged; a nested one has no effect.
         if (!section_.place.empty())
             section_.note(kUnsealed, placeOf(relative), "nothing",
                           "a ticket of nested code, which is not judged");
@@ -166,7 +166,7 @@ bool BundleWalk::visitSpecial(const DirectoryRef& directory, const Entry& entry,
     if (relative == kTicketFile && entry.kind == EntryKind::link &&
         directory->linkTarget(entry.name) == kCompatibilityTarget)
         return true;
-    // Special slot 1 covers it; where the seal lists it too, that is asked as well.
+    // Special slot 1 covers it; if the seal lists it too, the seal is checked as well.
     return relative == layout_.propertyList && entry.kind == EntryKind::file &&
            seal_.find(relative) == nullptr;
 }
@@ -205,7 +205,7 @@ void BundleWalk::visitSealed(const DirectoryRef& directory, const Entry& entry, 
             section_.fail(kSealedFile, place, "a file", kindName(entry.kind));
             break;
     }
-    // A directory in place of what was sealed may hold anything.
+    // A directory instead of the sealed entry may contain anything.
     if (entry.kind == EntryKind::directory) walk(directory->directory(entry.name), sealed.path);
 }
 
@@ -224,7 +224,7 @@ void BundleWalk::visitUnsealed(const DirectoryRef& directory, const Entry& entry
     }
 }
 
-/// What no rule can have been meant for; null if there is nothing of the sort.
+/// The fault of an entry that no rule may exempt; null if there is none.
 const char* BundleWalk::faultOfOmitted(const DirectoryRef& directory, const Entry& entry,
                                        const std::string& relative) const {
     switch (entry.kind) {
@@ -280,14 +280,14 @@ void BundleWalk::visitNested(const DirectoryRef& directory, const Entry& entry, 
     section_.sections.push_back(std::move(nested));
 }
 
-// Whether nested code is the code that the seal names.
+// Checks that nested code is the code that the seal names.
 void BundleWalk::bindNested(VerifiedCode nested, const SealedEntry& sealed, Section& section) {
     std::string wanted = sealed.digest.empty() ? std::string() : "cdhash " + foundation::toHex(sealed.digest);
     if (!sealed.text.empty()) wanted += (wanted.empty() ? "" : ", ") + sealed.text;
     std::string found;
     bool isNamed = false;
     for (CodeIdentity& identity : nested.identities) {
-        // What is nested further in is bound already, by its own bundle's seal.
+        // Deeper nested code is already bound by its own bundle's seal.
         if (identity.isNested) continue;
         identity.isNested = true;
         const bool hasHash = std::find(identity.codeHashes.begin(), identity.codeHashes.end(),

@@ -1,4 +1,4 @@
-// The walk over the files of one bundle, with its seal in hand. For bundle.cpp.
+// The walk over the files of one bundle, to check them against its seal. For bundle.cpp.
 #pragma once
 
 #include <string>
@@ -10,28 +10,28 @@
 
 namespace pinwell::verify {
 
-/// What the walks over a bundle and over all that is nested in it have in common.
+/// Shared by the walks over a bundle and over its nested bundles.
 struct WalkState {
     Workers& workers;
-    std::size_t entries = 0;  // directory entries met so far
-    unsigned depth = 0;       // directories and bundles around the one that is walked
+    std::size_t entries = 0;  // directory entries so far
+    unsigned depth = 0;       // directories and bundles around the current one
 };
 
-/// The bundle at `path`, which is at `place` in the artefact.
+/// Verifies the bundle at `path`, which is at `place` in the artefact.
 VerifiedCode verifyBundleAt(const std::string& path, const std::string& place, WalkState& state,
                             Section& section);
 
-/// Asks of a program that somebody may execute it: one that has lost that does not start.
+/// Checks that a program has an execute permission: without it, the program does not start.
 void checkExecuteBit(const OpenFile& file, const std::string& place, Section& section);
 
 class BundleWalk {
   public:
-    /// `rootPlace`: where the root of the seal is in the artefact. `bundlePath`: where the bundle is on disk.
+    /// `rootPlace`: the place of the seal's root in the artefact. `bundlePath`: the bundle's path on disk.
     /// The identities of nested code go into `code`.
     BundleWalk(const BundleLayout& layout, std::string rootPlace, std::string bundlePath, const Seal& seal,
                bool isImage, WalkState& state, Section& section, VerifiedCode& code);
 
-    /// Throws codesign::CodeError if a directory cannot be read, or passes the limits.
+    /// Throws codesign::CodeError if a directory cannot be read, or exceeds the limits.
     void run();
 
   private:

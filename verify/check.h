@@ -1,7 +1,7 @@
-// What deep verification finds: a tree of sections, each with its checks. A plain data model.
+// The findings of deep verification: a tree of sections, each with its checks. A plain data model.
 //
-// Every check says where it looked (`place`), what the signature states (`expected`) and what the bytes are
-// (`found`). Texts from a file are as they were found; a rendering escapes them.
+// Every check has a place (`place`), the value in the signature (`expected`) and the value of the bytes
+// (`found`). Texts from a file are unchanged; a rendering escapes them.
 #pragma once
 
 #include <cstddef>
@@ -11,19 +11,19 @@
 
 namespace pinwell::verify {
 
-/// In the order of gravity: the highest of several is the outcome of all.
+/// In the order of gravity: the outcome of several is the highest.
 enum class Outcome {
     passed,
-    skipped,     // not looked at; `found` says why
-    noted,       // worth knowing, and no fault: a matter of policy
-    unreadable,  // the bytes cannot be read, so nothing is known of them
-    failed,      // something is not as it was signed
+    skipped,     // not checked; `found` says why
+    noted,       // worth knowing, but not a fault: a matter of policy
+    unreadable,  // the bytes cannot be read, so their state is unknown
+    failed,      // something has changed since signing
 };
 
 /// "passed", "skipped", "noted", "unreadable", "failed".
 std::string_view outcomeName(Outcome outcome);
 
-/// One question and its result.
+/// One check and its result.
 struct Check {
     std::string name;   // from the closed list of check_names.h
     std::string place;  // in the artefact: a path below it, a slice, a page, a range of bytes
@@ -32,7 +32,8 @@ struct Check {
     std::string found;
 };
 
-/// The checks of one part of an artefact, and its parts. A section of a bundle is a piece of code in it.
+/// The checks of one part of an artefact, and its subsections. A section of a bundle is a piece of code in
+/// it.
 struct Section {
     std::string place;  // empty for the artefact itself
     std::vector<Check> checks;
@@ -46,13 +47,13 @@ struct Section {
     void cannotRead(std::string_view name, std::string place, std::string why);
 };
 
-/// The gravest outcome in a section and in all below it; passed if there is none.
+/// The gravest outcome in a section and its subsections; passed if there are no checks.
 Outcome worstOutcome(const Section& section);
 
-/// All checks of a section and of those below it, parents first.
+/// All checks of a section and its subsections, parents first.
 std::vector<Check> flattened(const Section& section);
 
-/// Failures of one kind kept apiece. Beyond it they are counted.
+/// Maximum number of failures of one kind that are kept. The rest are counted.
 inline constexpr std::size_t kMaximumFailuresKept = 256;
 
 /// Adds failures of one kind to a section, the first kMaximumFailuresKept one by one, the rest as a number.
@@ -70,7 +71,7 @@ class FailureList {
     Section& section_;
     std::string name_;
     std::size_t count_ = 0;
-    Outcome worst_ = Outcome::passed;  // of those that are only counted
+    Outcome worst_ = Outcome::passed;  // of the failures that are only counted
 };
 
 }  // namespace pinwell::verify

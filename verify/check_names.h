@@ -6,11 +6,11 @@
 namespace pinwell::verify {
 
 // The ticket.
-inline constexpr std::string_view kTicketStapled = "ticket-stapled";  // there is one
+inline constexpr std::string_view kTicketStapled = "ticket-stapled";  // a ticket is attached
 inline constexpr std::string_view kTicketGenuine = "ticket-genuine";  // well formed, trusted, signed
 inline constexpr std::string_view kTicketRevoked = "ticket-revoked";  // it does not revoke
 inline constexpr std::string_view kTicketLists = "ticket-lists";      // it lists the artefact
-inline constexpr std::string_view kTicketCurrent = "ticket-current";  // of the service, or of --tickets
+inline constexpr std::string_view kTicketCurrent = "ticket-current";  // from the service, or from --tickets
 inline constexpr std::string_view kCodeListed = "code-listed";        // it lists each slice and nested code
 
 // Code of every kind.
@@ -34,15 +34,15 @@ inline constexpr std::string_view kMissing = "missing";    // sealed, and not th
 // Disk images.
 inline constexpr std::string_view kTrailer = "trailer";
 inline constexpr std::string_view kImageData = "image-data";    // of an unsigned image
-inline constexpr std::string_view kBlockTable = "block-table";  // the second opinion
+inline constexpr std::string_view kBlockTable = "block-table";  // the second check
 
 // Flat packages.
 inline constexpr std::string_view kArchive = "archive";  // header and table of contents
 inline constexpr std::string_view kTableChecksum = "table-checksum";
 inline constexpr std::string_view kArchiveSignature = "archive-signature";
 inline constexpr std::string_view kArchivedFile = "archived-file";
-inline constexpr std::string_view kHeap = "heap";          // ranges, and what nothing claims
-inline constexpr std::string_view kTrailers = "trailers";  // behind the archive
+inline constexpr std::string_view kHeap = "heap";          // ranges, and unclaimed bytes
+inline constexpr std::string_view kTrailers = "trailers";  // after the archive
 
 // Policy.
 inline constexpr std::string_view kPolicyTicketAge = "policy-ticket-age";

@@ -98,7 +98,7 @@ DirectoryRef OpenDirectory::atPath(const std::string& path) {
 }
 
 std::vector<Entry> OpenDirectory::entries(std::size_t limit) const {
-    // Of its own position, so that several threads may list at once.
+    // With its own position, so that several threads may list at once.
     FileDescriptor own(openat(directory_.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     if (!own) fail(errno, "the directory");
     const Listing listing(fdopendir(own.get()));

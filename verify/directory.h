@@ -1,5 +1,5 @@
-// A directory inside an artefact, held open: everything is reached from it name by name, and no link is ever
-// followed, so nothing outside the artefact is opened whatever happens to its paths meanwhile.
+// An open directory inside an artefact. Everything is opened from it, name by name, and no link is ever
+// followed. So nothing outside the artefact is opened, even if its paths change meanwhile.
 #pragma once
 
 #include <sys/types.h>
@@ -45,13 +45,13 @@ class OpenFile final : public codesign::ByteSource {
 };
 
 /// Immutable; may be used from any number of threads. Every method throws codesign::CodeError: kIOError if
-/// something cannot be read, kStaticCodeNotFound if it is not there or is of another kind.
+/// something cannot be read, kStaticCodeNotFound if it does not exist or is of another kind.
 class OpenDirectory;
 using DirectoryRef = std::shared_ptr<const OpenDirectory>;
 
 class OpenDirectory {
   public:
-    /// The directory at a path of the caller's. Only its last component must not be a link.
+    /// The directory at the caller's path. Only the last component must not be a link.
     static DirectoryRef atPath(const std::string& path);
 
     /// In byte order of the names. At most `limit`; throws kUnimplemented for more.
@@ -62,7 +62,7 @@ class OpenDirectory {
     std::unique_ptr<OpenFile> file(const std::string& name) const;
     std::string linkTarget(const std::string& name) const;
 
-    /// The same by a path of names with slashes between, every one but the last a directory.
+    /// The same by a path of names with slashes between; each name except the last is a directory.
     std::unique_ptr<OpenFile> fileAt(std::string_view relativePath) const;
     DirectoryRef directoryAt(std::string_view relativePath) const;
 

@@ -24,7 +24,7 @@ namespace {
 
 const std::string kImagePlace = "disk image";
 
-/// Where the signature is: it ends at the trailer, or it is none.
+/// The place of the signature, which must end at the trailer.
 std::optional<FileRange> signatureArea(const DiskImageTrailer& trailer, Section& section) {
     const std::optional<FileRange> area = trailer.signature();
     if (!area) return std::nullopt;
@@ -49,7 +49,7 @@ void checkSigned(const ByteSource& source, const DiskImageTrailer& trailer, cons
     checkPageHashes(source, code, parts, kImagePlace, workers, section);
 }
 
-/// Whether a file without a trailer was an image: a trailer that is cut, moved, or damaged in its first
+/// Whether a file without a valid trailer was an image: its trailer is cut, moved, or damaged in its first
 /// bytes.
 bool wasDiskImage(const ByteSource& source) {
     constexpr std::uint64_t kTailSize = 8192;
@@ -70,7 +70,7 @@ VerifiedCode verified(const ByteSource& source, Workers& workers, Section& secti
         section.fail(kTrailer, "end of the file", "a disk image's trailer", "none that can be read");
         return {.isSigned = wasDiskImage(source), .identities = {}};
     }
-    // An image without a signature has a hash all the same, which is made up of all its data.
+    // An unsigned image still has a hash: the synthetic one over all its data.
     const std::optional<FileRange> area = signatureArea(*trailer, section);
     if (worstOutcome(section) == Outcome::failed) return {.isSigned = true, .identities = {}};
     checkBlockTables(source, *trailer, workers, section);
@@ -78,7 +78,7 @@ VerifiedCode verified(const ByteSource& source, Workers& workers, Section& secti
     const codesign::SharedBytes superblob = codesign::readSuperBlob(source, area->offset, area->length);
     checkBlobs(superblob, SignatureHost::diskImage, kImagePlace, section);
     const std::optional<SignatureParts> parts = SignatureParts::fromSuperBlob(superblob);
-    if (!parts) return {.isSigned = true, .identities = {}};  // it carries a ticket and nothing else
+    if (!parts) return {.isSigned = true, .identities = {}};  // it has only a ticket
     checkSigned(source, *trailer, *area, *parts, workers, section);
     return {.isSigned = true, .identities = {identityOf(*parts, kImagePlace)}};
 }

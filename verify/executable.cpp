@@ -67,7 +67,7 @@ class ImageCheck {
     }
 
   private:
-    /// False if the slice is not signed.
+    /// Returns false if the slice is not signed.
     bool checkSlice(const ImageSlice& slice, const std::string& at, std::optional<CodeIdentity>& identity) {
         const std::optional<FileRange> area = codesign::findImageSignature(source_, slice);
         if (!area) return false;
@@ -89,7 +89,7 @@ class ImageCheck {
         return true;
     }
 
-    /// Signers reserve room for a signature and leave in it what was there.
+    /// Signers reserve space for a signature and leave old bytes in it.
     void notePadding(const FileRange& padding, const std::string& at) {
         if (isZero(source_, padding)) return;
         section_.note(kBehindSignature,
@@ -113,7 +113,7 @@ class ImageCheck {
         std::optional<Data> embedded;
         if (!outside.contains(kSlotPropertyList)) {
             embedded = embeddedPropertyList(source_, slice, layout);
-            // It lies in the code, so the page hashes cover it.
+            // It is in the code, so the page hashes cover it.
             if (embedded) outside[kSlotPropertyList] = {.bytes = &*embedded, .mustBeCovered = false};
         }
         const FileRange code{slice.range.offset, area.offset - slice.range.offset};
@@ -152,7 +152,7 @@ VerifiedCode verifyExecutable(const ByteSource& source, const OutsideComponents&
     try {
         return ImageCheck(source, outside, place, workers, section).run();
     } catch (const CodeError& error) {
-        // Headers that lead nowhere: what is signed can no longer be told.
+        // The headers are broken, so the signed part cannot be found.
         if (error.status() == codesign::kIOError) {
             section.cannotRead(kImageStructure, place, error.what());
         } else {

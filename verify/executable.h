@@ -12,7 +12,7 @@
 
 namespace pinwell::verify {
 
-/// What one signature says of its code, for whoever has to recognise that code: the ticket, or a seal.
+/// The identity of code in one signature, by which a ticket or a seal recognises the code.
 struct CodeIdentity {
     std::string place;
     std::vector<Data> codeHashes;  // of all code directories, the chosen one's first
@@ -21,24 +21,24 @@ struct CodeIdentity {
     std::optional<std::string> team;
     bool hasSecureTimestamp = false;
     bool isNested = false;  // a seal names it
-    bool isSealed = false;  // it is what that seal names
+    bool isSealed = false;  // it is the code that the seal names
 };
 
-/// What a piece of code turned out to be.
+/// The findings about a piece of code.
 struct VerifiedCode {
-    /// Whether any part of it is signed. Without one there is nothing to hold the bytes against.
+    /// Whether any part of it is signed. If not, there is nothing to check the bytes against.
     bool isSigned = false;
 
-    /// One a slice, the preferred slice's first. Damaged signatures have no entry.
+    /// One for each slice, the preferred slice first. Damaged signatures have no entry.
     std::vector<CodeIdentity> identities;
 };
 
-/// `outside`: what the special slots of a bundle's main executable cover beside the signature. An image that
-/// is no bundle's has the property list that is embedded in it.
+/// `outside`: files that the special slots of a bundle's main executable cover. An image outside a bundle has
+/// its embedded property list.
 VerifiedCode verifyExecutable(const codesign::ByteSource& source, const OutsideComponents& outside,
                               const std::string& place, Workers& workers, Section& section);
 
-/// `parts` as they are known by.
+/// The identity that `parts` state.
 CodeIdentity identityOf(const SignatureParts& parts, std::string place);
 
 }  // namespace pinwell::verify

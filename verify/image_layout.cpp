@@ -28,10 +28,10 @@ constexpr std::uint32_t kProtectionExecute = 4;
 constexpr std::size_t kNameSize = 16;
 constexpr std::size_t kUniversalHeaderSize = 8;
 
-/// They are held whole. Those of very large programs take some 100 KiB.
+/// They are held whole. Very large programs have some 100 KiB.
 constexpr std::uint32_t kMaximumLoadCommands = std::uint32_t{16} * 1024 * 1024;
 
-/// Bytes that may be added after a signature to align what follows.
+/// Bytes that may follow a signature for alignment.
 constexpr std::uint64_t kMaximumPadding = 16;
 
 /// Reads numbers in the order and width of one image.
@@ -74,7 +74,7 @@ void readSegment(ImageReader body, ImageLayout& layout) {
     segment.isExecutable = ((most | first) & kProtectionExecute) != 0;
     const std::uint32_t sections = body.u32("count of sections");
     body.skip(4, "segment flags");
-    // Every section takes bytes of a bounded command, so a count that lies ends in a short read.
+    // Every section takes bytes of a bounded command, so a false count ends in a short read.
     for (std::uint32_t i = 0; i < sections; ++i) {
         const std::string name = body.name("section name");
         const std::string owner = body.name("section's segment");
@@ -95,7 +95,7 @@ struct ListedSlice {
     std::uint32_t spare = 0;
 };
 
-// readSlices() has shown that the list is there.
+// readSlices() has checked that the list exists.
 std::vector<ListedSlice> readList(const ByteSource& source, std::size_t count, bool is64, std::size_t& end) {
     const std::size_t entrySize = is64 ? 32 : 20;
     end = kUniversalHeaderSize + count * entrySize;
@@ -221,7 +221,7 @@ void checkBehindSignature(const ByteSource& source, const ImageSlice& slice, con
     const std::uint64_t begin = signature.offset - slice.range.offset;
     for (const Segment& segment : layout.segments) {
         if (!segment.isExecutable || segment.range.length == 0) continue;
-        // Neither number is trusted to add up.
+        // The sum of the two numbers could overflow.
         const bool isBefore =
             segment.range.offset <= begin && segment.range.length <= begin - segment.range.offset;
         if (!isBefore)

@@ -1,6 +1,6 @@
-// What deep verification asks of the headers of an executable image, beside where its signature is
-// (codesign/executable_image.h, whose layout tables hold here too): which parts are mapped as code, where the
-// embedded property list is, and whether the bytes that no hash covers are the ones that no hash can cover.
+// Reads the headers of an executable image for deep verification, besides the signature's place
+// (codesign/executable_image.h, whose layout tables apply here too). Finds the parts mapped as code and the
+// embedded property list. Checks that hashes cover every byte that they can cover.
 #pragma once
 
 #include <cstdint>
@@ -34,19 +34,19 @@ struct ImageLayout {
 /// Throws codesign::CodeError or foundation::ShortRead.
 ImageLayout readImageLayout(const ByteSource& source, const codesign::ImageSlice& slice);
 
-/// Asks of a universal image that its list of slices says of each what the slice says of itself, that its
-/// gaps are zero, and that nothing is after the last slice. Passes for a thin image.
+/// Checks that a universal image's list of slices agrees with the slices, that its gaps are zero, and that
+/// nothing is after the last slice. Passes for a thin image.
 void checkUniversalHeader(const ByteSource& source, const std::vector<codesign::ImageSlice>& slices,
                           const std::string& place, Section& section);
 
-/// Asks that no segment which can be executed reaches to the signature, and that the slice ends with it but
-/// for padding of zeros. Offsets of `signature` count from the file's start.
+/// Checks that no executable segment reaches the signature, and that the slice ends with the signature,
+/// except for zero padding. Offsets of `signature` count from the file's start.
 void checkBehindSignature(const ByteSource& source, const codesign::ImageSlice& slice,
                           const ImageLayout& layout, const FileRange& signature, const std::string& place,
                           Section& section);
 
-/// Whether an executable image is one that a system can start, and not a library of code. Throws as
-/// readImageLayout() does.
+/// Whether a system can start the executable image: it is a program, not a library. Throws like
+/// readImageLayout().
 bool isProgram(const ByteSource& source);
 
 /// "64-bit ARM slice", "64-bit x86 slice", "slice of CPU type 0x...".

@@ -1,4 +1,4 @@
-// A ticket, judged by the tool's rules, and the checks that follow from it.
+// A ticket judged by the tool's rules, and the checks on it.
 #pragma once
 
 #include <cstdint>
@@ -16,11 +16,11 @@ namespace pinwell::verify {
 
 using foundation::ByteView;
 
-/// What a ticket says, if it is genuine.
+/// The statements of a genuine ticket.
 class JudgedTicket {
   public:
-    /// Judges `bytes` as the tool does (satchel_get_validated_tm_ticket). `explain` is called for a ticket
-    /// that is not genuine, and says why.
+    /// Judges `bytes` like the tool (satchel_get_validated_tm_ticket). For a ticket that is not genuine,
+    /// calls `explain`, which returns the reason.
     JudgedTicket(ByteView bytes, trust::TrustService& trust, const std::function<std::string()>& explain);
 
     bool isGenuine() const noexcept { return isGenuine_; }
@@ -49,13 +49,13 @@ class JudgedTicket {
 bool checkTicket(const JudgedTicket& ticket, const std::optional<Data>& codeHash, const std::string& place,
                  Section& section);
 
-/// Adds a check for each piece of code: the ticket lists it, or the seal of code that the ticket lists names
-/// it. Returns whether somebody vouches for each.
+/// Adds a check for each piece of code: the ticket lists it, or the seal of listed code names it. Returns
+/// whether all passed.
 bool checkListing(const VerifiedCode& code, const std::function<bool(ByteView codeHash)>& lists,
                   Section& section);
 
-/// Adds a check that fails unless `codeHash`, which the tool has found, is that of the code that was
-/// verified: both were read from one path, one after the other. Returns whether it is.
+/// Adds a check that `codeHash`, found by the tool, is the hash of the verified code: the two were read from
+/// one path, one after the other. Returns whether it is.
 bool checkOneArtefact(const VerifiedCode& code, const std::optional<Data>& codeHash, Section& section);
 
 }  // namespace pinwell::verify

@@ -7,10 +7,10 @@ namespace pinwell::verify {
 
 namespace {
 
-/// As many as the kernel follows.
+/// The kernel's limit.
 constexpr unsigned kMaximumLinks = 40;
 
-/// Adds the names of a path to those still to be walked, which are kept in reverse.
+/// Adds the names of a path to the pending names, which are kept in reverse.
 void pushNames(std::string_view path, std::vector<std::string>& pending) {
     while (!path.empty()) {
         const std::size_t slash = path.rfind('/');
@@ -20,7 +20,7 @@ void pushNames(std::string_view path, std::vector<std::string>& pending) {
     }
 }
 
-/// What is left when a name does not exist: inside unless it climbs.
+/// Whether the pending names, after a missing one, stay inside: none leads above.
 bool staysBelow(const std::vector<std::string>& pending) {
     for (const std::string& name : pending)
         if (name == "..") return false;

@@ -1,4 +1,4 @@
-// Where a symbolic link inside a bundle leads.
+// The target of a symbolic link inside a bundle.
 #pragma once
 
 #include <string_view>
@@ -7,9 +7,9 @@
 
 namespace pinwell::verify {
 
-/// Whether the link at `path` below `root` leads to something at or below `root`, by way of other links too.
-/// A target that does not exist is inside if its path never leaves the root. Throws codesign::CodeError if
-/// something on the way cannot be read.
+/// Whether the link at `path` below `root` leads to `root` or below it, also through other links. A target
+/// that does not exist is inside if its path never leaves the root. Throws codesign::CodeError if a step
+/// cannot be read.
 bool leadsInside(const DirectoryRef& root, std::string_view path);
 
 }  // namespace pinwell::verify

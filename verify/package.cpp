@@ -32,7 +32,7 @@ namespace {
 constexpr std::size_t kTablePieceSize = std::size_t{64} * 1024;
 constexpr std::string_view kCmsStyle = "CMS";
 
-/// Longest signature that is held whole; one takes some 10 KiB.
+/// Longest signature that is held whole; a real one takes some 10 KiB.
 constexpr std::uint64_t kMaximumSignature = std::uint64_t{16} * 1024 * 1024;
 
 struct Archive {
@@ -40,10 +40,10 @@ struct Archive {
     ArchiveTable table;
     xar::DigestAlgorithm algorithm = xar::DigestAlgorithm::none;
     Data computed;  // checksum of the table
-    Data stored;    // the one in the heap, which is signed
+    Data stored;    // the signed one in the heap
 };
 
-/// The fields that the archive reader passes over: no checksum covers the header.
+/// Checks the fields that the archive reader ignores: no checksum covers the header.
 void requireHeaderForm(ByteView start, const xar::Header& header) {
     constexpr std::size_t kVersionOffset = 6;
     constexpr std::uint16_t kVersion = 1;
@@ -97,14 +97,14 @@ Archive readArchive(const ByteSource& source, std::uint64_t end) {
     return archive;
 }
 
-/// A range of the heap as one of the file; `nullopt` if it lies outside.
+/// A range of the heap as a range of the file; `nullopt` if it is outside.
 std::optional<FileRange> inFile(const Archive& archive, const FileRange& range, std::uint64_t end) {
     const std::uint64_t heap = end - archive.heapStart;
     if (range.offset > heap || range.length > heap - range.offset) return std::nullopt;
     return FileRange{archive.heapStart + range.offset, range.length};
 }
 
-/// Whether it was meant to be an archive, as far as that shows in a damaged header too.
+/// Whether the header looks like an archive's, possibly a damaged one.
 bool beginsAsArchive(const ByteSource& source) {
     constexpr std::uint32_t kMagic = 0x78617221;
     constexpr std::uint16_t kVersion = 1;
@@ -192,7 +192,7 @@ class PackageCheck {
         code.identities.push_back(std::move(identity));
     }
 
-    /// A message that states its length, without the zeros that fill the space set aside for it.
+    /// The bytes up to the length that a message states, without the zeros that fill its reserved space.
     static ByteView withoutPadding(ByteView bytes) {
         try {
             foundation::ByteReader reader(bytes);
@@ -205,7 +205,7 @@ class PackageCheck {
                 length = 0;
                 for (std::uint64_t i = 0; i < count; ++i) length = length << 8U | reader.u8("length");
             } else if (length == kLongForm) {
-                return bytes;  // it ends where its contents say
+                return bytes;  // an indefinite length: its contents end it
             }
             if (length > reader.remaining()) return bytes;
             const std::size_t end = reader.position() + static_cast<std::size_t>(length);
@@ -254,7 +254,7 @@ class PackageCheck {
             section_.pass(kArchivedFile, "heap", format("%zu entries with their checksums", all.size()));
     }
 
-    /// Whoever unpacks the archive makes paths of the names.
+    /// Programs that unpack the archive make paths of the names.
     void checkNames(FailureList& failures) const {
         using Child = std::pair<std::optional<std::size_t>, std::string_view>;
         std::set<Child> seen;
@@ -272,7 +272,7 @@ class PackageCheck {
         }
     }
 
-    /// Empty if the bytes are as the table says.
+    /// Empty if the bytes match the table.
     std::string faultOf(const ArchivedData& data, Outcome& outcome) const {
         if (!data.problem.empty()) return data.problem;
         const auto range = inFile(archive_, data.range, end_);
@@ -306,12 +306,12 @@ class PackageCheck {
         return all;
     }
 
-    // Two files of the same contents may share them; no other bytes belong to two.
+    // Two files with the same contents may share their bytes; other overlaps are faults.
     void checkHeap() {
         FailureList overlaps(section_, kHeap);
         FailureList gaps(section_, kHeap);
         const std::uint64_t heap = end_ - archive_.heapStart;
-        std::uint64_t claimed = 0;  // all before it belongs to something, or was reported
+        std::uint64_t claimed = 0;  // all bytes before it are claimed or reported
         const Claim* last = nullptr;
         const std::vector<Claim> all = claims();
         for (const Claim& claim : all) {
@@ -332,7 +332,7 @@ class PackageCheck {
         if (overlaps.count() == 0) section_.pass(kHeap, "heap", "entries that do not overlap");
     }
 
-    // The table of contents, which is signed, says where a gap is, and nothing says what is in it.
+    // The signed table of contents gives the place of a gap, but nothing covers its bytes.
     void reportGap(std::uint64_t begin, std::uint64_t end, FailureList& gaps) const {
         if (begin >= end) return;
         const bool isInside = end < end_ - archive_.heapStart;

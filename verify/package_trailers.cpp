@@ -17,7 +17,7 @@ using foundation::format;
 
 namespace {
 
-/// The first bytes of a source, as the walk along the trailers reads them.
+/// The first bytes of a source, as a file for the walk along the trailers.
 class StartOfSource final : public files::FileReader {
   public:
     StartOfSource(const ByteSource& source, std::uint64_t end) : source_(source), end_(end) {}
@@ -57,7 +57,7 @@ class TrailerCheck {
     }
 
   private:
-    /// The tool's walk goes to the last ticket, and no further. Returns whether there may be more.
+    /// The tool's walk stops at the last ticket. Returns whether there may be more.
     bool walkOnce() {
         const std::uint64_t before = end_;
         StartOfSource reader(source_, before);

@@ -1,8 +1,8 @@
-// What is behind a package's archive (src/PWHashedFile/package_trailer.h), as deep verification asks for it:
-// nothing, or a terminator and one ticket.
+// The bytes after a package's archive (src/PWHashedFile/package_trailer.h), as deep verification requires
+// them: none, or a terminator and one ticket.
 //
-// The tool passes over trailers of other types and keeps them. Here they are faults, since nothing covers
-// them; so are a second ticket, a chain without its terminator, and records whose unused bytes are not zero.
+// The tool skips trailers of other types and keeps them. Here they are faults, because nothing covers them. A
+// second ticket, a chain without its terminator, and records with non-zero unused bytes are faults too.
 #pragma once
 
 #include <cstdint>
@@ -12,7 +12,7 @@
 
 namespace pinwell::verify {
 
-/// Where the archive ends and the trailers begin, in bytes from the start. Adds a check for each fault.
+/// The end of the archive, where the trailers begin, in bytes from the start. Adds a check for each fault.
 /// Throws codesign::CodeError if the bytes cannot be read.
 std::uint64_t endOfArchive(const codesign::ByteSource& source, Section& section);
 

@@ -71,7 +71,7 @@ std::size_t digestLength(Algorithm algorithm) {
 }
 
 PageDigest::PageDigest(Algorithm algorithm) : state_(std::make_unique<State>()) {
-    // Fetched once: the fetch by name is what an implicit one repeats for every piece.
+    // Fetched once: an implicit fetch would search by name for every piece.
     state_->algorithm.reset(EVP_MD_fetch(nullptr, nameOf(algorithm), nullptr));
     state_->context.reset(EVP_MD_CTX_new());
     if (!state_->algorithm || !state_->context ||

@@ -1,4 +1,4 @@
-// Digests of many short pieces: one context that is used again for each of them.
+// Digests of many short pieces, with one context for all of them.
 #pragma once
 
 #include <array>
@@ -22,8 +22,8 @@ enum class Algorithm { md5, sha1, sha224, sha256, sha384, sha512 };
 Algorithm algorithmOf(codesign::DigestType type);
 std::size_t digestLength(Algorithm algorithm);
 
-/// For one thread at a time. Throws std::bad_alloc if the algorithm cannot be had here (for want of memory,
-/// or by local policy).
+/// For one thread at a time. Throws std::bad_alloc if the algorithm is not available (no memory, or local
+/// policy).
 class PageDigest {
   public:
     explicit PageDigest(Algorithm algorithm);
@@ -31,10 +31,10 @@ class PageDigest {
     PageDigest(PageDigest&&) noexcept;
     PageDigest& operator=(PageDigest&&) noexcept;
 
-    /// Of one piece. The result is good until the next call.
+    /// The digest of one piece. The result is valid until the next call.
     ByteView of(ByteView bytes);
 
-    // Of a piece that comes in pieces itself.
+    // For a piece in several parts.
     void begin();
     void update(ByteView bytes);
     ByteView finish();
@@ -44,15 +44,15 @@ class PageDigest {
     std::unique_ptr<State> state_;
 };
 
-/// The thread's own, kept for its life: making one costs as much as using it on a page.
+/// The thread's own digest, kept until the thread ends: making one costs as much as hashing a page.
 PageDigest& threadDigest(Algorithm algorithm);
 
-/// A buffer of `kBufferSize` bytes, the thread's own. A function that uses it calls none that does.
+/// The thread's own buffer of `kBufferSize` bytes. A function that uses it must not call another that does.
 inline constexpr std::size_t kBufferSize = std::size_t{512} * 1024;
 std::span<std::byte> threadBuffer();
 
-/// Of a range of a source, with the thread's digest and buffer; good until that digest is used again. Throws
-/// codesign::CodeError.
+/// The digest of a range of a source, with the thread's digest and buffer; valid until that digest is used
+/// again. Throws codesign::CodeError.
 ByteView digestOf(Algorithm algorithm, const codesign::ByteSource& source, const codesign::FileRange& range);
 
 /// Whether a range of a source is all zero. Uses the thread's buffer. Throws codesign::CodeError.

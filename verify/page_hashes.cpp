@@ -22,7 +22,7 @@ namespace {
 constexpr std::uint8_t kLargestPageShiftInBuffer = 19;
 static_assert(std::size_t{1} << kLargestPageShiftInBuffer == kBufferSize);
 
-/// Beyond it a shift means nothing: no file is that long.
+/// A larger shift has no meaning: no file is that long.
 constexpr std::uint8_t kMaximumPageShift = 62;
 
 std::uint64_t pageSize(const Directory& directory, std::uint64_t codeLength) {
@@ -32,7 +32,7 @@ std::uint64_t pageSize(const Directory& directory, std::uint64_t codeLength) {
 
 std::uint64_t slotsNeeded(const Directory& directory, std::uint64_t codeLength) {
     const std::uint64_t size = pageSize(directory, codeLength);
-    // Whole code as one page has a hash even where it is empty.
+    // The whole code as one page has a hash even if it is empty.
     if (directory.pageShift == 0) return 1;
     return codeLength / size + (codeLength % size != 0 ? 1 : 0);
 }
@@ -121,7 +121,7 @@ class PageCheck {
     void compare(const Directory& directory, std::uint32_t page, std::uint64_t begin, std::uint64_t length,
                  ByteView found) {
         const ByteView expected = directory.codeDigest(page);
-        // A stated digest may be a cut one.
+        // A stated digest may be cut.
         if (std::equal(expected.begin(), expected.end(), found.begin())) return;
         const std::lock_guard lock(mutex_);
         if (different_.size() >= kMaximumFailuresKept * 4) {

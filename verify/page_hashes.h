@@ -11,18 +11,18 @@
 
 namespace pinwell::verify {
 
-/// Holds `code`, a range of `source`, against the hashes of all directories. Memory: one buffer a thread.
-/// Adds one check a directory, and one more for each page that differs. A range that cannot be read any more
-/// is `unreadable`.
+/// Checks `code`, a range of `source`, against the hashes of all directories. Memory: one buffer for each
+/// thread. Adds one check for each directory, and one for each page that differs. If the range can no longer
+/// be read, the outcome is `unreadable`.
 ///
-/// Asked before: every directory's limit is the length of `code` (checkCodeLimit). A directory whose limit is
-/// another is left out.
+/// Call checkCodeLimit first: every directory's limit must be the length of `code`. A directory with another
+/// limit is skipped.
 void checkPageHashes(const codesign::ByteSource& source, const codesign::FileRange& code,
                      const SignatureParts& parts, const std::string& place, Workers& workers,
                      Section& section);
 
-/// Whether the hashes of every directory cover exactly `codeLength` bytes, in the number of slots that they
-/// take. `what` names what stands there: "the signature".
+/// Checks that the hashes of every directory cover exactly `codeLength` bytes, with the right number of
+/// slots. `what` names the next part: "the signature".
 void checkCodeLimit(const SignatureParts& parts, std::uint64_t codeLength, const std::string& what,
                     const std::string& place, Section& section);
 

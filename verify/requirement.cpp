@@ -35,7 +35,7 @@ class Evaluation {
     Evaluation(const CodeIdentity& code, std::string_view text) : code_(code), rest_(text) { next(); }
 
     Satisfied run() {
-        // "designated =>" in front says whose requirement it is.
+        // A leading "designated =>" names the kind of the requirement.
         if (isWord("designated") || isWord("host") || isWord("guest")) {
             next();
             while (token_.kind == Token::Kind::other) next();
@@ -153,7 +153,7 @@ class Evaluation {
                            [&](const Data& hash) { return foundation::toHex(hash) == wanted; });
     }
 
-    // A question that is not for us, up to where the next one begins.
+    // Skips an unsupported condition, up to the next one.
     Satisfied passOver() {
         bool isEmpty = true;
         while (token_.kind != Token::Kind::end && token_.kind != Token::Kind::close &&

@@ -1,4 +1,4 @@
-// Requirements on nested code, as far as they can be told without trusting anybody's certificate.
+// Requirements on nested code, as far as they can be evaluated without trust in a certificate.
 //
 //   designated => identifier "com.example.helper" and cdhash H"0123..."
 //
@@ -8,7 +8,7 @@
 // | cdhash H"HEX"         | one of the cdhashes                                                         |
 // | always, never         |                                                                             |
 // | and, or, !, ( )       | as usual; "and" binds closer than "or"                                      |
-// | any other             | cannot be told: it asks for certificates, which are not looked at           |
+// | any other             | unknown: it is about certificates, which are not examined                   |
 #pragma once
 
 #include <string_view>
@@ -19,7 +19,7 @@ namespace pinwell::verify {
 
 enum class Satisfied { no, unknown, yes };
 
-/// Never throws. What is no requirement, or is nested beyond reason, is `unknown`.
+/// Never throws. Returns `unknown` for text that is not a requirement, or is nested too deeply.
 Satisfied satisfies(const CodeIdentity& code, std::string_view requirement);
 
 }  // namespace pinwell::verify

@@ -158,7 +158,7 @@ Seal Seal::parse(ByteView document) {
         }
         seal.rules_.push_back(std::move(rule));
     }
-    // Of two rules of one weight, the one that lets nothing out.
+    // If two rules have one weight, the one that exempts nothing comes first.
     std::stable_sort(seal.rules_.begin(), seal.rules_.end(), [](const Rule& a, const Rule& b) {
         return a.weight != b.weight ? a.weight > b.weight : a.effect.omits < b.effect.omits;
     });

@@ -14,7 +14,7 @@ using codesign::CodeError;
 
 namespace {
 
-/// Enough that no thread waits long for the others. Every job may hold a directory open.
+/// Large enough that no thread waits long for the others. Every job may hold a directory open.
 constexpr std::size_t kBatchSize = 256;
 
 }  // namespace

@@ -1,4 +1,4 @@
-// Holding the files of a bundle against their sealed digests, many at a time.
+// Checks the files of a bundle against their sealed digests, many at a time.
 #pragma once
 
 #include <mutex>
@@ -12,17 +12,17 @@
 
 namespace pinwell::verify {
 
-/// Collects files and hashes them in batches on all threads. Memory and open directories are those of one
+/// Collects files and hashes them in batches on all threads. Memory and open directories are limited to one
 /// batch.
 class SealedFiles {
   public:
-    /// All must outlive the object.
+    /// The arguments must outlive the object.
     SealedFiles(Workers& workers, Section& section);
 
     /// `entry` must live until finish(). `place` is shown to people.
     void add(DirectoryRef directory, std::string name, const SealedEntry& entry, std::string place);
 
-    /// Hashes what is left and adds the checks. Once, and last.
+    /// Hashes the remaining files and adds the checks. Call it once, and last.
     void finish();
 
   private:
@@ -49,7 +49,7 @@ class SealedFiles {
     std::size_t hashed_ = 0;
     std::mutex mutex_;
     std::vector<Fault> faults_;
-    std::size_t uncounted_ = 0;  // faults beyond those that are kept
+    std::size_t uncounted_ = 0;  // faults that are not kept
 };
 
 }  // namespace pinwell::verify

@@ -26,7 +26,7 @@ bool isDirectorySlot(std::uint32_t slot) {
            (slot >= codesign::kSlotFirstAlternate && slot <= codesign::kSlotLastAlternate);
 }
 
-// CodeDirectory::parse has shown that these fields are there and what they lead to lies in the blob.
+// CodeDirectory::parse has checked that these fields exist and refer to bytes in the blob.
 Directory withFields(std::uint32_t slot, CodeDirectory content) {
     Directory directory{.slot = slot, .content = std::move(content)};
     ByteReader reader(directory.content.bytes());

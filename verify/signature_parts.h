@@ -1,8 +1,8 @@
-// A signature taken apart for deep verification: its code directories with the fields that the hashes are
-// read by, its components, and the signer's message.
+// The parts of a signature for deep verification: its code directories with the fields that locate the
+// hashes, its components, and the signer's message.
 //
-// The rules of form are those of codesign/code_directory.h and codesign/superblob.h; here they are applied to
-// every blob, since here every blob counts.
+// The rules of form are in codesign/code_directory.h and codesign/superblob.h. Here they apply to every blob,
+// because every blob counts.
 #pragma once
 
 #include <cstdint>
@@ -22,14 +22,14 @@ using codesign::DigestType;
 using foundation::ByteView;
 using foundation::Data;
 
-/// A code directory and the fields of its header that codesign has no use for.
+/// A code directory, with the fields of its header that codesign does not use.
 struct Directory {
     std::uint32_t slot = 0;
     codesign::CodeDirectory content;
     std::uint32_t hashOffset = 0;
     std::uint32_t specialSlots = 0;
     std::uint32_t codeSlots = 0;
-    std::uint64_t limit = 0;     // of the code that the hashes cover, in bytes from its start
+    std::uint64_t limit = 0;     // end of the hashed code, in bytes from its start
     std::uint8_t pageShift = 0;  // a page is two to this power; 0: all is one page
     bool hasScatter = false;
 
@@ -43,7 +43,7 @@ struct Directory {
 /// Owns all of its bytes.
 class SignatureParts {
   public:
-    /// From the bytes of a superblob, padding and all. `nullopt` if it has no code directory. Throws
+    /// From the bytes of a superblob, with padding. `nullopt` if it has no code directory. Throws
     /// codesign::CodeError or foundation::ShortRead if it is not well formed.
     static std::optional<SignatureParts> fromSuperBlob(codesign::SharedBytes superblob);
 
@@ -55,7 +55,7 @@ class SignatureParts {
     /// By slot; slot 0 is the first. Directories of unknown digest types are left out.
     const std::vector<Directory>& directories() const noexcept { return directories_; }
 
-    /// The one whose hash is the cdhash.
+    /// The directory whose hash is the cdhash.
     const Directory& chosen() const;
 
     /// The cdhashes of all directories, the chosen one's first.
@@ -70,26 +70,26 @@ class SignatureParts {
     SignatureParts() = default;
     void addDirectory(std::uint32_t slot, const codesign::SharedBytes& blob);
 
-    std::vector<codesign::SharedBytes> storage_;  // what the views are of
+    std::vector<codesign::SharedBytes> storage_;  // the bytes behind the views
     std::vector<Directory> directories_;
     std::map<std::uint32_t, ByteView> components_;
     ByteView cms_;
 };
 
-/// What a superblob is in. Only a disk image has its ticket there.
+/// The kind of file around a superblob. Only a disk image has its ticket there.
 enum class SignatureHost { executable, diskImage };
 
-/// Asks that every blob of a well-formed superblob be one that something covers, that it have the magic of
-/// its slot, and that nothing but zeros be between the blobs. The ticket's blob covers itself.
+/// Checks that every blob of a well-formed superblob is covered and has the magic of its slot, and that only
+/// zeros are between the blobs. The ticket's blob covers itself.
 void checkBlobs(ByteView superblob, SignatureHost host, const std::string& place, Section& section);
 
-/// Asks that all code directories say the same, each in its own digest type. A reader goes by the one that it
-/// prefers, and a ticket need not list them all.
+/// Checks that all code directories agree, each in its own digest type. This matters because each reader uses
+/// the one that it prefers, and a ticket need not list them all.
 void checkAgreement(const SignatureParts& parts, const std::string& place, Section& section);
 
-/// Something that a special slot covers and that does not travel with the signature.
+/// A file that a special slot covers, outside the signature.
 struct OutsideComponent {
-    const Data* bytes = nullptr;  // null: there is nothing of that kind
+    const Data* bytes = nullptr;  // null: it does not exist
     bool mustBeCovered = true;    // no other hash covers it
 };
 using OutsideComponents = std::map<std::uint32_t, OutsideComponent>;
@@ -98,12 +98,12 @@ using OutsideComponents = std::map<std::uint32_t, OutsideComponent>;
 inline constexpr std::uint32_t kSlotPropertyList = 1;
 inline constexpr std::uint32_t kSlotResourceSeal = 3;
 
-/// Holds every special slot of every directory against what it covers, and asks that every component be
-/// covered.
+/// Checks every special slot of every directory against the bytes that it covers, and checks that every
+/// component is covered.
 void checkSpecialSlots(const SignatureParts& parts, const OutsideComponents& outside,
                        const std::string& place, Section& section);
 
-/// Whether the signer's message verifies, or is rightly absent.
+/// Checks that the signer's message verifies, or is absent where it may be.
 void checkSigner(const SignatureParts& parts, const std::string& place, Section& section);
 
 /// Adds a note if the message has certificates whose own signatures cannot be verified.

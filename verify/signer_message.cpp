@@ -33,7 +33,7 @@ constexpr std::string_view kEcKey = "\x2A\x86\x48\xCE\x3D\x02\x01";           //
 constexpr std::string_view kPss = "\x2A\x86\x48\x86\xF7\x0D\x01\x01\x0A";     // 1.2.840.113549.1.1.10
 constexpr std::string_view kNull{"\x05\x00", 2};
 
-/// Digests under the names that algorithms of signatures have for them (trust/signature_algorithm.h).
+/// Digests by their names in signature algorithms (trust/signature_algorithm.h).
 struct NamedDigest {
     std::string_view identifier;
     std::string_view name;
@@ -62,10 +62,10 @@ bool isOfDigest(std::string_view name, ByteView identifier) {
     });
 }
 
-/// The key's algorithm says no digest; any other must say the one that was used.
+/// The key's own algorithm names no digest; any other must name the used one.
 void requireSignatureAlgorithm(const SignedMessage& message) {
     const codesign::Algorithm& algorithm = message.signer.signatureAlgorithm;
-    if (is(algorithm.identifier, kPss)) return;  // its parameters are what verifies
+    if (is(algorithm.identifier, kPss)) return;  // verification uses its parameters
     requirePlainParameters(algorithm);
     if (is(algorithm.identifier, kRsaKey) || is(algorithm.identifier, kEcKey)) return;
     Data element = codesign::ber::makeElement(codesign::ber::kObjectIdentifier, algorithm.identifier);
@@ -99,7 +99,7 @@ std::vector<X509CertificateRef> certificatesIn(const SignedMessage& message) {
     return certificates;
 }
 
-/// Names in a certificate tell its issuer, and so does a key identifier where it has one.
+/// Refuses if the message has the issuer by its key identifier, although not by its name.
 void requireNoIssuerByKey(const std::vector<X509CertificateRef>& all, const X509Certificate& subject) {
     const std::optional<Data>& wanted = subject.extensions().authorityKeyIdentifier;
     if (wanted && std::ranges::any_of(all, [&](const X509CertificateRef& one) {
@@ -108,8 +108,8 @@ void requireNoIssuerByKey(const std::vector<X509CertificateRef>& all, const X509
         refuse("a certificate in the signer's message does not name its issuer");
 }
 
-/// Follows the chain from the certificate that `signerKey` is in. Returns how many certificates end it
-/// without an issuer.
+/// Follows the chain from the certificate at `signer`. Returns the number of certificates without an issuer
+/// at its end.
 std::size_t requireChain(const std::vector<X509CertificateRef>& all, std::size_t signer) {
     std::vector<bool> counts(all.size());
     std::vector<std::size_t> pending{signer};
@@ -139,7 +139,7 @@ std::size_t requireChain(const std::vector<X509CertificateRef>& all, std::size_t
     return withoutIssuer;
 }
 
-/// The place of the signer's certificate: the first that the signer names, as codesign finds it.
+/// The position of the signer's certificate: the first one that the signer names, as in codesign.
 std::size_t placeOfSigner(const SignedMessage& message, const std::vector<X509CertificateRef>& certificates) {
     const codesign::MessageSigner& signer = message.signer;
     for (std::size_t i = 0; i < certificates.size(); ++i) {
@@ -158,7 +158,7 @@ std::size_t requireCertificates(const SignedMessage& message) {
     return requireChain(certificates, placeOfSigner(message, certificates));
 }
 
-/// The parts of a message that its signature does not cover.
+/// Checks the parts of a message that its signature does not cover.
 SignerMessage requireRest(const SignedMessage& message) {
     requireForm(message);
     return {.hasTimestamp = false, .certificatesWithoutIssuer = requireCertificates(message)};

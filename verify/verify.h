@@ -4,11 +4,11 @@
 //   const Report report = verifyArtefact({Kind::bundle, "Sample.app"}, workers);
 //   if (worstOutcome(report.root) == Outcome::failed) ...
 //
-// No ticket is looked at here. Whoever has one asks whether it lists `report.code`.
+// Tickets are not read here. The caller checks that a ticket lists `report.code`.
 //
-// Reads only. Work is in proportion to the bytes that the artefact has: each is read once. Memory does not
-// grow with them, apart from the signature and the seal or the table of contents, which are held whole.
-// Several artefacts may be verified at once, with the same workers.
+// Reads only. Work is in proportion to the artefact's bytes: each is read once. Memory holds the whole
+// signature, and the seal or the table of contents; it does not grow with the other bytes. Several artefacts
+// may be verified at once, with the same workers.
 #pragma once
 
 #include <string>
@@ -31,7 +31,7 @@ struct Report {
     Section root;
 };
 
-/// Never throws for what is wrong with the artefact: that is what the checks say. Throws std::bad_alloc.
+/// Never throws for a fault of the artefact: the checks report it. Throws std::bad_alloc.
 Report verifyArtefact(const Subject& subject, Workers& workers);
 
 }  // namespace pinwell::verify

@@ -35,7 +35,7 @@ Workers::Workers(unsigned threads) {
     try {
         for (unsigned i = 1; i < threads; ++i) pool_.emplace_back([this] { run(); });
     } catch (const std::system_error&) {
-        // Slower, and no worse.
+        // With fewer threads it is only slower.
     }
 }
 
@@ -58,7 +58,7 @@ void Workers::run() {
             batch = batches_.front();
         }
         workOn(*batch);
-        // All of its parts have begun, so nobody else need look at it.
+        // All of its parts have begun, so no other thread needs it.
         const std::lock_guard lock(mutex_);
         std::erase(batches_, batch);
     }

@@ -12,12 +12,12 @@
 
 namespace pinwell::verify {
 
-/// A fixed number of threads. forEach may be called from any thread, from within a part of another forEach
-/// too: the caller works on its own parts, so nothing waits for a thread that waits.
+/// A fixed number of threads. forEach may be called from any thread, even from a part of another forEach. The
+/// caller works on its own parts, so a waiting thread never waits for another waiting thread.
 class Workers {
   public:
-    /// `threads` in all, the caller's included; 0 stands for the number of processors that this process may
-    /// use. Fewer run where no more threads can be had.
+    /// `threads` in all, with the caller's; 0 means the number of processors that this process may use. Fewer
+    /// run if no more threads can be started.
     explicit Workers(unsigned threads = 0);
     ~Workers();
     Workers(const Workers&) = delete;
@@ -26,8 +26,8 @@ class Workers {
     unsigned threads() const noexcept { return static_cast<unsigned>(pool_.size()) + 1; }
 
     /// Calls `part` once for each number below `count`, on several threads, and returns when all are done.
-    /// What a part throws is thrown here, the first of them, when all that had begun are done; parts that had
-    /// not begun are then left out.
+    /// Rethrows the first exception of a part, after all running parts are done; parts that have not begun
+    /// are then skipped.
     void forEach(std::size_t count, const std::function<void(std::size_t)>& part);
 
   private:
