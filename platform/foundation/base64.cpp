@@ -18,7 +18,7 @@ constexpr std::array<std::uint8_t, 256> kValues = [] {
     return values;
 }();
 
-// Decodes two to four characters, the padding already taken off, to one to three bytes.
+// Decodes two to four characters, without the padding, to one to three bytes.
 bool decodeGroup(std::string_view group, Data& out) {
     std::uint32_t bits = 0;
     for (const char c : group) {
@@ -28,7 +28,7 @@ bool decodeGroup(std::string_view group, Data& out) {
     }
     bits <<= 6U * static_cast<unsigned>(4 - group.size());
     const std::size_t bytes = group.size() - 1;
-    // What the padding cuts off must be zero, or one buffer would have several spellings.
+    // The bits that the padding cuts off must be zero; otherwise one buffer would have several encodings.
     if ((bits & (0xFFFFFFU >> (8U * bytes))) != 0) return false;
     for (std::size_t i = 0; i < bytes; ++i, bits <<= 8U) out.push_back(static_cast<std::byte>(bits >> 16U));
     return true;

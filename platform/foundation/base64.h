@@ -9,8 +9,8 @@
 
 namespace pinwell::foundation {
 
-/// Nothing when `text` holds any character outside the alphabet (line breaks included), is not padded to a
-/// multiple of four, or has set bits in what the padding cuts off. Empty text gives an empty buffer.
+/// Returns `nullopt` if `text` has a character outside the alphabet (even a line break), is not padded to a
+/// multiple of four, or has set bits that the padding cuts off. Empty text gives an empty buffer.
 std::optional<Data> decodeBase64(std::string_view text);
 
 std::string encodeBase64(ByteView bytes);

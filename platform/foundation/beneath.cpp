@@ -18,11 +18,11 @@
 namespace pinwell::foundation {
 namespace {
 
-// As many links as the kernel follows on one path.
+// The kernel's limit of links on one path.
 constexpr int kMaximumLinks = 40;
 
-// How often openat2(2) is asked again: it gives up with EAGAIN when a directory anywhere is moved while ".."
-// is on the path. The walk does not.
+// How often openat2(2) is repeated: with ".." on the path, it fails with EAGAIN if any directory is moved
+// meanwhile. The walk does not.
 constexpr int kMaximumTries = 16;
 
 FileDescriptor opened(int directory, const char* name, int flags, mode_t mode) {
@@ -68,7 +68,7 @@ class Walk {
   private:
     int here() const { return way_.empty() ? root_ : way_.back().get(); }
 
-    // Puts the path's components before those that are left. False, with errno set, when that leads out.
+    // Puts the path's components before the remaining ones. Returns false, with errno set, if that leads out.
     bool prepend(std::string_view path) {
         if (path.starts_with('/')) {
             errno = EXDEV;
@@ -85,7 +85,7 @@ class Walk {
         return true;
     }
 
-    // Goes into a directory, or along a link. False when the walk is over: end_ is what it found.
+    // Enters a directory, or follows a link. Returns false at the end of the walk: end_ is the result.
     bool enter(const std::string& name, bool last) {
         FileDescriptor next = opened(here(), name.c_str(), O_PATH | O_NOFOLLOW, 0);
         struct stat status {};
@@ -104,7 +104,7 @@ class Walk {
     }
 
     bool finish(const std::string& name) {
-        // A link that has taken its place since the look is refused.
+        // If a link has replaced it since the check, it is refused.
         end_ = opened(here(), name.c_str(), flags_ | O_NOFOLLOW, mode_);
         return false;
     }
@@ -143,7 +143,7 @@ FileDescriptor openBeneath(int root, const std::string& path, int flags, mode_t 
         const long number = syscall(SYS_openat2, root, name, &how, sizeof how);
         if (number >= 0) return FileDescriptor(static_cast<int>(number));
         if (errno == EINTR) continue;
-        // EPERM: what older container runtimes say to calls that they do not know.
+        // EPERM: the error of older container runtimes for unknown calls.
         if (errno == ENOSYS || errno == EPERM) break;
         if (errno != EAGAIN) return FileDescriptor();
         ++tries;

@@ -26,7 +26,7 @@ bool isDirectory(const HeldPlace& bundle, const std::string& relative) {
     return bundle.open(relative, O_PATH | O_DIRECTORY).has_value();
 }
 
-// Of the entry itself: what a link in the bundle leads to is not part of it.
+// Status of the entry itself: the target of a link is not part of the bundle.
 std::optional<struct stat> statusOfEntry(int directory, const char* name, mode_t format) {
     struct stat status {};
     if (fstatat(directory, name, &status, AT_SYMLINK_NOFOLLOW) != 0) return std::nullopt;
@@ -38,13 +38,13 @@ bool isPlainName(std::string_view name) {
            name.find('\0') == std::string_view::npos;
 }
 
-// What is reached only through a link that leads out (EXDEV) is not there either.
+// A path through a link that leads out (EXDEV) counts as missing too.
 bool isAbsent(const Error& error) {
     return error.code() == ENOENT || error.code() == ENOTDIR || error.code() == EXDEV;
 }
 
 Result<Data> readListAt(const HeldPlace& bundle, const std::string& relative) {
-    // Looked at before it is opened for reading: opening alone can have an effect on a device.
+    // Checked before it is opened for reading: opening alone can have an effect on a device.
     const auto looked = bundle.open(relative, O_PATH);
     if (!looked) return looked.error();
     struct stat status {};
@@ -54,7 +54,7 @@ Result<Data> readListAt(const HeldPlace& bundle, const std::string& relative) {
     return readSmallFile(*file, relative, kMaximumPropertyListSize);
 }
 
-// The first of `candidates` that is there; an unreadable one hides those behind it.
+// The first of `candidates` that exists; an unreadable one hides the ones after it.
 Value informationDictionary(const HeldPlace& bundle, std::initializer_list<std::string> candidates) {
     for (const std::string& relative : candidates) {
         const Result<Data> document = readListAt(bundle, relative);
@@ -84,7 +84,8 @@ std::optional<std::string> executableIn(const HeldPlace& bundle, const std::stri
     return relative.empty() ? name : relative + "/" + name;
 }
 
-// Files of one class, of which one alone can be the executable. Keeps the first path and the number of all.
+// Files of one class, of which a single one can be the executable. Keeps the first path and the number of
+// all.
 struct Candidates {
     std::string first;
     std::size_t count = 0;
@@ -112,14 +113,14 @@ void addCandidate(int contents, const std::string& directory, const std::string&
     (mayExecute ? executable : other).add(directory + "/" + name);
 }
 
-// A directory that cannot be read to its end might hold a second candidate.
+// A directory that cannot be read completely might have a second candidate.
 std::optional<std::string> executableBelow(const HeldPlace& bundle, const std::string& name) {
     if (!isPlainName(name)) return std::nullopt;
     auto contents = bundle.open(std::string(kContents), O_RDONLY | O_DIRECTORY);
     if (!contents) return std::nullopt;
     const DirectoryStream stream(fdopendir(contents->get()));
     if (!stream) return std::nullopt;
-    const int directory = contents->release();  // the stream's now
+    const int directory = contents->release();  // the stream owns it now
 
     Candidates executable;
     Candidates other;

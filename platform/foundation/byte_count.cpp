@@ -22,7 +22,7 @@ std::uint64_t scaled(std::uint64_t bytes, const Unit& unit) {
     const std::uint64_t whole = bytes >> unit.shift;
     std::uint64_t rest = bytes & ((std::uint64_t{1} << unit.shift) - 1);
     unsigned shift = unit.shift;
-    if (shift > 50) {  // leaves room for the multiplication; no shown digit depends on the bits that go
+    if (shift > 50) {  // makes room for the multiplication; no shown digit depends on the lost bits
         rest >>= shift - 50;
         shift = 50;
     }
@@ -48,7 +48,7 @@ std::string formatByteCount(std::uint64_t bytes) {
     if (bytes == 1) return "1 byte";
     if (bytes < 1024) return fmt::format("{} bytes", bytes);
     for (const Unit& unit : kUnits) {
-        // What rounds up to 1024 of a unit is shown as 1 of the next.
+        // A count that rounds up to 1024 of a unit is shown as 1 of the next.
         const std::uint64_t count = scaled(bytes, unit);
         if (count < 1024 * unit.scale) return fmt::format("{} {}", decimal(count, unit.scale), unit.name);
     }

@@ -1,8 +1,8 @@
-// The one bounds-checked cursor over bytes that came from outside.
+// The only bounds-checked cursor over bytes from outside.
 //
-// Nothing else in the tree indexes raw input. Every check compares the wanted length with what remains, so no
-// sum of two numbers from a file is ever formed, and every read says what it was reading, so that a refusal
-// can name the field and its offset.
+// Nothing else in the tree indexes raw input. Every check compares the wanted length with the bytes that
+// remain, so two numbers from a file are never added. Every read names its field, so that a refusal can name
+// the field and its offset.
 #pragma once
 
 #include <cstdint>
@@ -19,20 +19,20 @@ class ShortRead : public std::runtime_error {
   public:
     ShortRead(std::string_view what, std::size_t offset, std::size_t wanted, std::size_t remaining);
 
-    /// Where in the outermost buffer the read began; for a position outside the reader's bytes, where those
-    /// begin.
+    /// Offset of the read in the outermost buffer; for a position outside the reader's bytes, the offset of
+    /// those bytes.
     std::size_t offset() const noexcept { return offset_; }
 
   private:
     std::size_t offset_;
 };
 
-/// A forward cursor. It owns nothing: the bytes must outlive it and every view it hands out.
-/// The multi-byte reads assemble their value from single bytes, so alignment and host order do not matter.
-/// Throws ShortRead, and then has not moved.
+/// A forward cursor. It owns nothing: the bytes must outlive it and every view that it returns. The
+/// multi-byte reads assemble their value from single bytes, so alignment and host order do not matter. Throws
+/// ShortRead; then it has not moved.
 class ByteReader {
   public:
-    /// `base` is the offset of `bytes` in the buffer that messages should speak of.
+    /// `base` is the offset of `bytes` in the buffer that messages refer to.
     explicit ByteReader(ByteView bytes, std::size_t base = 0) noexcept : bytes_(bytes), base_(base) {}
 
     std::size_t position() const noexcept { return position_; }

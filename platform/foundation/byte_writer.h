@@ -7,7 +7,7 @@
 
 namespace pinwell::foundation {
 
-/// Builds a buffer field by field. Each call appends and answers the writer, so that a layout reads as a
+/// Builds a buffer field by field. Each call appends and returns the writer, so that a layout reads like a
 /// list.
 class ByteWriter {
   public:

@@ -1,4 +1,4 @@
-// Byte buffers: what every format is read from and written to.
+// Byte buffers, for reading and writing every format.
 #pragma once
 
 #include <cstddef>
@@ -13,7 +13,7 @@ namespace pinwell::foundation {
 /// An owned byte buffer. A buffer that may be missing is a `std::optional<Data>`.
 using Data = std::vector<std::byte>;
 
-/// Bytes owned by somebody else; valid as long as their owner is.
+/// Bytes with another owner; valid as long as the owner.
 using ByteView = std::span<const std::byte>;
 
 /// The bytes of a text, not copied.
@@ -38,7 +38,7 @@ inline std::string toString(ByteView bytes) {
     return text;
 }
 
-/// Two lower-case hexadecimal digits a byte, no separators.
+/// Two lower-case hexadecimal digits for each byte, no separators.
 std::string toHex(ByteView bytes);
 
 /// `bytes` must not lie in `data` itself, which may move.

@@ -7,7 +7,7 @@
 namespace pinwell::foundation {
 namespace {
 
-// What the calendar can show in four digits of a year; a date from a file may hold anything.
+// The dates with a four-digit year; a date from a file may have any value.
 constexpr std::int64_t kFirstShown = -62135596800;  // 0001-01-01
 constexpr std::int64_t kLastShown = 253402300799;   // 9999-12-31
 

@@ -10,13 +10,13 @@
 namespace pinwell::foundation {
 namespace {
 
-// A byte buffer longer than this shows its first and last bytes only.
+// A longer byte buffer shows only its first and last bytes.
 constexpr std::size_t kWholeExcerpt = 24;
 constexpr std::size_t kExcerptHead = 16;
 constexpr std::size_t kExcerptTail = 4;
 
 constexpr unsigned kIndentStep = 4;
-constexpr unsigned kDeepestIndent = 16;  // deeper lines stand no further in
+constexpr unsigned kDeepestIndent = 16;  // deeper lines are not indented further
 
 void appendEscaped(std::string& out, std::string_view bytes) {
     if (bytes == "\n")
@@ -54,8 +54,8 @@ std::string decimal(double number) {
     return fmt::format("{}", number);
 }
 
-// Containers are written into one text, not joined from their elements' texts, and indented only so far: what
-// a document nested hundreds of levels deep comes to would otherwise grow with length times depth.
+// Containers are written into one text, not joined from their elements' texts, and the indentation is
+// limited. Otherwise the text of a deeply nested document would grow with length times depth.
 void append(std::string& out, const Array& array, unsigned indent);
 void append(std::string& out, const Dictionary& dictionary, unsigned indent);
 
@@ -134,7 +134,7 @@ std::string describe(const Error& error) {
         if (!first) text += ", ";
         first = false;
         text += escapeForTerminal(key) + "=";
-        // In braces, not in quotes: a chain of errors would double its backslashes at every link.
+        // In braces, not in quotes: in a chain of errors, quotes would double the backslashes at every link.
         text += value.error() != nullptr ? "{" + describe(*value.error()) + "}" : describe(value);
     }
     return text + "}";

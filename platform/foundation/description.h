@@ -1,14 +1,14 @@
-// What "%@" prints: one textual description for every platform object.
+// The output of "%@": one textual description for every platform object.
 //
 //   nil                (null); a JSON null <null>
-//   text               itself; control characters and bytes that are not UTF-8 as escapes, so that nothing
-//                      that came from a file or a server can drive the terminal
+//   text               itself; control characters and bytes outside UTF-8 as escapes, so that no text from
+//                      a file or a server can control the terminal
 //   number             decimal; booleans 1 and 0
 //   byte buffer        {length = 20, bytes = 0x00010203 04050607 ... 10111213}
 //   date               2026-11-20 19:55:00 +0000
 //   file URL           file:///a%20b
 //   error              Error Domain=D Code=N "text" UserInfo={...}
-//   array, dictionary  the old property-list style, keys sorted; what is no single word inside is quoted
+//   array, dictionary  the old property-list style, keys sorted; texts inside are quoted unless single words
 //
 // A type of another service becomes printable by specialising Description beside its declaration.
 #pragma once
@@ -28,7 +28,7 @@
 
 namespace pinwell::foundation {
 
-/// Left undefined for a type that has no description: `Description<T>::of(const T&)` answers the text.
+/// `Description<T>::of(const T&)` returns the text; undefined for a type without a description.
 template <class T>
 struct Description;
 
@@ -37,7 +37,7 @@ inline constexpr std::string_view kNilDescription = "(null)";
 /// The text with control characters (C0, DEL, C1) and malformed UTF-8 replaced by backslash escapes.
 std::string escapeForTerminal(std::string_view text);
 
-/// The text as a property-list token: bare when it consists of letters, digits and "._/$-" alone, else
+/// The text as a property-list token: bare if it consists only of letters, digits and "._/$-", otherwise
 /// quoted.
 std::string quoteForPropertyList(std::string_view text);
 

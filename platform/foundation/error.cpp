@@ -24,7 +24,7 @@ Error::Error(std::string_view domain, std::int64_t code, std::string text)
     : domain_(domain), code_(code), text_(std::move(text)) {}
 
 Error Error::posix(int number, std::string_view path) {
-    // Not strerror: this one is neither translated nor shared between threads.
+    // Unlike strerror, this one is not translated and not shared between threads.
     const char* text = strerrordesc_np(number);
     Error error(kPOSIXErrorDomain, number,
                 text == nullptr ? fmt::format("Error {}.", number) : std::string(text));

@@ -13,7 +13,7 @@
 
 namespace pinwell::foundation {
 
-/// Error domains: whose numbering an error's code belongs to.
+/// Error domains: the numbering of an error's code.
 inline constexpr std::string_view kPOSIXErrorDomain = "POSIXErrorDomain";        // errno
 inline constexpr std::string_view kOSStatusErrorDomain = "OSStatusErrorDomain";  // platform status numbers
 inline constexpr std::string_view kURLErrorDomain = "URLErrorDomain";            // https/session.h
@@ -22,7 +22,7 @@ inline constexpr std::string_view kDataErrorDomain = "DataErrorDomain";         
 /// Codes of kDataErrorDomain.
 inline constexpr std::int64_t kMalformedDocument = 1;     // it does not follow its format
 inline constexpr std::int64_t kExcessiveDocument = 2;     // it exceeds a limit on length, nesting or values
-inline constexpr std::int64_t kUnrepresentableValue = 3;  // the format cannot say it
+inline constexpr std::int64_t kUnrepresentableValue = 3;  // the format cannot express it
 
 /// User-information keys.
 inline constexpr std::string_view kFilePathKey = "FilePath";
@@ -49,13 +49,13 @@ class Error {
     /// One sentence for a person, naming the file where there is one.
     std::string localizedDescription() const;
 
-    /// The bare reason, without what it concerns.
+    /// The bare reason, without the item that it is about.
     const std::string& localizedFailureReason() const noexcept { return text_; }
 
-    /// What else is known. Whoever reads it includes foundation/value.h.
+    /// What else is known. Readers include foundation/value.h.
     const Dictionary& userInfo() const noexcept;
 
-    /// The same error with one more entry of user information. Whoever calls it includes foundation/value.h.
+    /// The same error with one more entry of user information. Callers include foundation/value.h.
     Error with(std::string_view key, const Value& value) &&;
 
     bool operator==(const Error& other) const;
@@ -64,10 +64,10 @@ class Error {
     std::string domain_;
     std::int64_t code_;
     std::string text_;
-    std::shared_ptr<const Dictionary> userInfo_;  // null while there is none
+    std::shared_ptr<const Dictionary> userInfo_;  // null if there is none
 };
 
-/// Either a value or the error that kept it from being made.
+/// Either a value or the error that prevented it.
 template <class T>
 class [[nodiscard]] Result {
   public:

@@ -15,13 +15,13 @@ namespace {
 
 constexpr std::size_t kChunk = 16 * 1024;
 
-// 0 for a regular file, else the errno value that says why it is refused.
+// 0 for a regular file, otherwise the errno value of the refusal.
 int refusal(const struct stat& status) {
     if (S_ISREG(status.st_mode)) return 0;
     return S_ISDIR(status.st_mode) ? EISDIR : EINVAL;
 }
 
-// The wanted number of bytes or fewer, 0 at the end, -1 with errno.
+// Returns up to the wanted number of bytes, 0 at the end, -1 with errno.
 ssize_t readChunk(int file, std::span<std::byte> chunk) {
     ssize_t count = 0;
     do count = ::read(file, chunk.data(), chunk.size());
@@ -38,9 +38,9 @@ void FileDescriptor::reset() noexcept {
 
 Result<Data> readSmallFile(const std::string& path, std::size_t limit) {
     if (path.find('\0') != std::string::npos) return Error::posix(EINVAL, path);
-    // Asked before opening, since opening alone can have an effect on a device; asked again after, since the
-    // name may lead somewhere else by then. O_NONBLOCK keeps a FIFO that slips in between from blocking the
-    // open.
+    // Checked before opening, because opening alone can have an effect on a device. Checked again afterwards,
+    // because the name may lead elsewhere by then. O_NONBLOCK prevents blocking on a FIFO that appears in
+    // between.
     struct stat status {};
     if (::stat(path.c_str(), &status) != 0) return Error::posix(errno, path);
     if (const int reason = refusal(status)) return Error::posix(reason, path);

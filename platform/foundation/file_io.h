@@ -33,13 +33,13 @@ class FileDescriptor {
     int number_ = -1;
 };
 
-/// The whole of a regular file of at most `limit` bytes. Follows symbolic links; refuses what is not a
-/// regular file without blocking on it (EINVAL; EISDIR for a directory) and a longer file (EFBIG). Memory
-/// grows with what is really read, never with what the file claims. The error is of kPOSIXErrorDomain and
-/// names the path.
+/// The whole of a regular file of at most `limit` bytes. Follows symbolic links; refuses anything but a
+/// regular file without blocking (EINVAL; EISDIR for a directory), and a longer file (EFBIG). Memory grows
+/// with the bytes really read, never with the file's claims. The error is of kPOSIXErrorDomain and names the
+/// path.
 Result<Data> readSmallFile(const std::string& path, std::size_t limit);
 
-/// The same of a file that is open, from its position on. Errors name it `path`.
+/// The same for an open file, from its position on. Errors name it `path`.
 Result<Data> readSmallFile(const FileDescriptor& file, const std::string& path, std::size_t limit);
 
 }  // namespace pinwell::foundation

@@ -6,7 +6,7 @@
 namespace pinwell::foundation::format_detail {
 namespace {
 
-// Longest field that a width or precision in one of our formats can ask for.
+// Longest field for the widths and precisions in our formats.
 constexpr std::size_t kFieldSize = 128;
 
 std::string formatInteger(std::string_view specification, const Conversion& conversion,
@@ -34,7 +34,7 @@ std::string formatInteger(std::string_view specification, const Conversion& conv
     return {field, std::min(static_cast<std::size_t>(written), kFieldSize - 1)};
 }
 
-// Width and precision of a text conversion, which count bytes as printf's do.
+// Width and precision of a text conversion count bytes, as in printf.
 std::string formatText(std::string_view specification, std::string text) {
     bool left = false;
     std::size_t width = 0;

@@ -25,7 +25,7 @@ enum class ArgumentKind { object, int8, int32, int64, text };
 
 /// One conversion of a format: from '%' to its letter.
 struct Conversion {
-    std::size_t end = 0;  // index just behind the letter
+    std::size_t end = 0;  // index after the letter
     char letter = '\0';
     ArgumentKind wants = ArgumentKind::object;
 };
@@ -115,9 +115,9 @@ constexpr bool fits(ArgumentKind wants) {
     return false;
 }
 
-/// An argument on its way to the formatter: an integer, or the text of an object.
+/// An argument for the formatter: an integer, or the text of an object.
 struct Argument {
-    std::uint64_t integer = 0;  // sign-extended when the argument was signed
+    std::uint64_t integer = 0;  // sign-extended if the argument was signed
     std::string text;
 };
 
@@ -138,7 +138,7 @@ std::string formatArguments(std::string_view format, std::span<const Argument> a
 
 }  // namespace format_detail
 
-/// A format that was checked against `Args`. Made from a string literal only.
+/// A format checked against `Args`. Made only from a string literal.
 template <class... Args>
 class FormatString {
   public:

@@ -5,7 +5,7 @@
 
 namespace pinwell::foundation {
 
-/// Gives an object back by the function that its library names for that.
+/// Frees an object with its library's function.
 template <auto release>
 struct Releaser {
     template <class T>

@@ -21,20 +21,20 @@ Error excessive(std::string text) {
     return {kDataErrorDomain, kExcessiveDocument, std::move(text)};
 }
 
-// Receives the library's events and builds the value on a stack of its own, so that a deep document costs
-// heap in proportion to its length, and no call stack. Returning false ends the parse.
+// Receives the library's events and builds the value on its own stack. So a deep document needs heap in
+// proportion to its length, and no call stack. Returning false ends the parse.
 class Builder {
   public:
     bool null() { return add(Value::Null{}); }
     bool boolean(bool flag) { return add(flag); }
     bool number_integer(std::int64_t number) { return add(number); }
     bool number_unsigned(std::uint64_t number) {
-        // One kind for what both kinds can hold, so that equal numbers are the same value.
+        // One kind for numbers that fit both kinds, so that equal numbers are the same value.
         return std::in_range<std::int64_t>(number) ? add(static_cast<std::int64_t>(number)) : add(number);
     }
     bool number_float(double number, const std::string&) { return add(number); }
     bool string(std::string& text) { return add(std::move(text)); }
-    bool binary(Library::binary_t&) { return false; }  // never met in text
+    bool binary(Library::binary_t&) { return false; }  // never in text
 
     bool start_object(std::size_t) { return open(true); }
     bool key(std::string& name) {
@@ -46,7 +46,7 @@ class Builder {
     bool end_array() { return close(); }
 
     bool parse_error(std::size_t position, const std::string&, const nlohmann::detail::exception&) {
-        // The library counts the byte that it stumbled over.
+        // The library's count includes the faulty byte.
         error_ = malformed(fmt::format("The JSON document is malformed at byte {}.",
                                        std::max<std::size_t>(position, 1) - 1));
         return false;
@@ -62,7 +62,7 @@ class Builder {
   private:
     struct Container {
         bool isObject = false;
-        std::string key;  // of the member that comes next
+        std::string key;  // of the next member
         Dictionary members;
         Array elements;
     };
@@ -142,7 +142,7 @@ Library toLibrary(const Value& value, unsigned depth) {
 Result<Value> parseJSON(ByteView document) {
     if (document.size() > kMaximumJSONSize)
         return excessive(fmt::format("The JSON document is longer than {} bytes.", kMaximumJSONSize));
-    // The library takes a zero byte for the end of the text, and would not look at what follows.
+    // The library treats a zero byte as the end of the text, and would not read the rest.
     if (const auto zero = std::find(document.begin(), document.end(), std::byte{0}); zero != document.end())
         return malformed(fmt::format("The JSON document is malformed at byte {}.", zero - document.begin()));
     Builder builder;

@@ -10,20 +10,21 @@ namespace pinwell::foundation {
 /// Deepest nesting of arrays and objects that is read.
 inline constexpr unsigned kMaximumJSONDepth = 512;
 
-/// Longest document and largest number of values that is read. The first is the longest answer of a server
-/// that is looked at; the second bounds memory, since the shortest value takes two bytes of text and far more
-/// in memory.
+/// Longest document and largest number of values that are read. The first is the maximum length of a server's
+/// response. The second bounds memory, because the shortest value takes two bytes of text and far more in
+/// memory.
 inline constexpr std::size_t kMaximumJSONSize = 64 * 1024 * 1024;
 inline constexpr std::size_t kMaximumJSONValues = 1'000'000;
 
 /// The document, whose top level must be an object or an array. UTF-8, one leading byte-order mark allowed,
-/// nothing but white space behind it. The last of several equal keys wins. An integer that fits 64 bits stays
-/// an integer; a number that a double cannot hold is an error. The error (kDataErrorDomain) of a malformed
+/// only white space after it. The last of several equal keys wins. An integer that fits 64 bits stays an
+/// integer; a number that a double cannot hold is an error. The error (kDataErrorDomain) of a malformed
 /// document names the byte position.
 Result<Value> parseJSON(ByteView document);
 
-/// Without pretty-printing; keys in sorted order. Fails for what JSON cannot say: nil, byte buffers, dates,
-/// URLs, errors, a number that is not finite, text that is not UTF-8, a top level that is no object or array.
+/// Without pretty-printing; keys in sorted order. Fails for values that JSON cannot express: nil, byte
+/// buffers, dates, URLs, errors, a number that is not finite, text that is not UTF-8, a top level that is not
+/// an object or array.
 Result<Data> serializeJSON(const Value& value);
 
 }  // namespace pinwell::foundation

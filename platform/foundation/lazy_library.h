@@ -1,21 +1,21 @@
-// Shared libraries that only some runs need, opened when one does.
+// Shared libraries that only some runs need, opened on demand.
 //
-// A library that is linked costs every start of the program: it is mapped and relocated with all that it
-// depends on in turn. One that a run rarely reaches is opened here instead, and its functions are found by
+// A linked library slows down every start of the program: it is mapped and relocated, with all its
+// dependencies. A rarely needed library is opened here instead, and its functions are found by
 // name.
 #pragma once
 
 namespace pinwell::foundation {
 
-/// Opened when it is made, never closed: what a library leaves behind (threads, exit handlers) needs it
-/// there.
+/// Opened by the constructor, never closed: a library may leave threads and exit handlers that need its
+/// code.
 class LazyLibrary {
   public:
     explicit LazyLibrary(const char* name);
     LazyLibrary(const LazyLibrary&) = delete;
     LazyLibrary& operator=(const LazyLibrary&) = delete;
 
-    /// Whether it could be opened, and every function asked for so far was there.
+    /// Whether it could be opened, and every function so far was found.
     bool isComplete() const noexcept { return complete_; }
 
     /// Points `function` at the library's function of that name, or at null.

@@ -9,7 +9,7 @@ namespace pinwell::foundation {
 
 namespace {
 
-/// Marks, embeddings, overrides and isolates of the direction of writing (UAX #9).
+/// Characters that control the direction of writing: marks, embeddings, overrides and isolates (UAX #9).
 constexpr std::array<std::pair<std::string_view, std::string_view>, 12> kDirections{{
     {"\xD8\x9C", "\\u061c"},
     {"\xE2\x80\x8E", "\\u200e"},
@@ -55,9 +55,9 @@ std::string markupText(std::string_view text) {
                 result += c;
         }
     }
-    // What turns the direction of writing makes one name look like another.
+    // A change of direction can make one name look like another.
     for (const auto& [mark, name] : kDirections) replaceAll(result, mark, name);
-    // Two code points that XML has no place for, and that UTF-8 can say.
+    // Two code points that XML forbids, but UTF-8 can encode.
     for (const std::string_view none : {"\xEF\xBF\xBE", "\xEF\xBF\xBF"})
         replaceAll(result, none, "\xEF\xBF\xBD");
     return result;

@@ -6,8 +6,8 @@
 
 namespace pinwell::foundation {
 
-/// In UTF-8, without control characters and without what turns the direction of writing, with the characters
-/// of markup as entities: good between tags and in quoted attributes.
+/// In UTF-8, without control characters and without characters that change the direction of writing. Markup
+/// characters become entities. For use between tags and in quoted attributes.
 std::string markupText(std::string_view text);
 
 }  // namespace pinwell::foundation

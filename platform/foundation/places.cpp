@@ -20,7 +20,7 @@ struct Split {
     std::string name;
 };
 
-// A path into its last component and the rest; "." for what has no component of its own.
+// Splits a path into its last component and the rest; "." for a path without components.
 Split split(const std::string& path) {
     const std::size_t slash = path.rfind('/');
     if (slash == std::string::npos) return {".", path};
@@ -29,7 +29,7 @@ Split split(const std::string& path) {
     return {slash == 0 ? "/" : path.substr(0, slash), std::move(name)};
 }
 
-// The result of `call`, made again for as long as a signal interrupts it.
+// The result of `call`, repeated while a signal interrupts it.
 template <class Call>
 int uninterrupted(Call call) {
     for (;;) {
@@ -107,9 +107,9 @@ Result<Anchor> Places::hold(const std::string& path) {
 }
 
 Result<Place> Places::find(const std::string& path) const {
-    // As the kernel does, which here sees parts of the path alone.
+    // Like the kernel, which here sees only parts of the path.
     if (path.size() >= PATH_MAX) return Error::posix(ENAMETOOLONG, path);
-    // Of several, the one that is nearest.
+    // The nearest one, if there are several.
     Anchor from;
     for (Anchor& anchor : held())
         if (anchor->relative(path) && (!from || anchor->directory().size() > from->directory().size()))

@@ -1,12 +1,12 @@
-// Where items are: a name in an open directory, instead of a path that leads somewhere else at every call.
+// The places of items: a name in an open directory, instead of a path that may lead elsewhere at every call.
 //
 //   const Anchor held = places.hold("/Applications/Tool.app");
 //   places.find("/Applications/Tool.app/Contents/CodeResources")
 //
-// While a directory is held, all paths below it are resolved from the descriptor that was opened first, and
-// nothing is reached through a link that leads out of it (openBeneath). While any other item is held, the
-// same is so for its own name and its siblings' in the directory that it stands in. Other paths are resolved
-// as the kernel does.
+// While a directory is held, all paths below it are resolved from the first opened descriptor, and
+// links that lead out of it are not followed (openBeneath). While any other item is held, the same is
+// true for its own name and its siblings' names in its directory. The kernel resolves all other
+// paths.
 #pragma once
 
 #include <sys/stat.h>
@@ -27,25 +27,25 @@ namespace pinwell::foundation {
 struct Place {
     std::shared_ptr<const FileDescriptor> parent;  // opened with O_PATH
     std::string name;                              // a single component; "." for a held directory itself
-    std::string path;                              // as the caller named it: errors speak of it
+    std::string path;                              // the caller's path, for errors
 
     int directory() const noexcept { return parent->get(); }
 
-    /// Status of the item itself, a link not followed.
+    /// Status of the item itself, without following a link.
     Result<struct stat> status() const;
 
-    /// The item itself, a link not followed (ELOOP); close-on-exec. `flags` as for open(2).
+    /// The item itself, without following a link (ELOOP); close-on-exec. `flags` as for open(2).
     Result<FileDescriptor> open(int flags, mode_t mode = 0) const;
 
-    /// The directory that the item stands in, opened for reading.
+    /// The item's directory, opened for reading.
     Result<FileDescriptor> openParent() const;
 };
 
-/// A directory that is held open.
+/// A directory kept open.
 class HeldPlace {
   public:
-    /// `item` is what was asked for; `isTree` says that all below the directory is reached from it, and not
-    /// its own entries alone.
+    /// `item` is the requested path. If `isTree`, all paths below the directory are resolved from it;
+    /// otherwise only its own entries.
     HeldPlace(std::string item, std::string directory, bool isTree, FileDescriptor descriptor)
         : item_(std::move(item)),
           directory_(std::move(directory)),
@@ -61,7 +61,7 @@ class HeldPlace {
     /// resolved from here.
     std::optional<std::string> relative(const std::string& path) const;
 
-    /// Opens what is at `relative`, links followed that stay below (openBeneath). Errors name the whole path.
+    /// Opens `relative`, following links that stay below (openBeneath). Errors name the whole path.
     Result<FileDescriptor> open(const std::string& relative, int flags) const;
 
   private:
@@ -81,12 +81,12 @@ class Places {
     Places(const Places&) = delete;
     Places& operator=(const Places&) = delete;
 
-    /// Holds the item at `path`, which is absolute: a directory itself, of anything else the directory that
-    /// it stands in. A path that is held already keeps its descriptor, whatever the name leads to by now. An
-    /// error is the lookup's own.
+    /// Holds the item at the absolute `path`: a directory itself, or the directory of any other item. A path
+    /// that is already held keeps its descriptor, even if the name now leads elsewhere. An error comes from
+    /// the lookup.
     Result<Anchor> hold(const std::string& path);
 
-    /// Errors with EXDEV for what is reached through a link that leads out of a held directory.
+    /// Returns EXDEV if the path goes through a link that leads out of a held directory.
     Result<Place> find(const std::string& path) const;
 
   private:

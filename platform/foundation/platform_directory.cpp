@@ -38,7 +38,7 @@ bool isLabel(std::string_view label) {
            std::all_of(label.begin(), label.end(), [](char c) { return isLetterOrDigit(c) || c == '-'; });
 }
 
-// A host name as RFC 1123, section 2.1, has it. One whose last label is a number must be an IPv4 address.
+// A host name as in RFC 1123, section 2.1. If its last label is a number, it must be an IPv4 address.
 bool isHostName(std::string_view host) {
     if (host.size() > kLongestHostName) return false;
     const std::string_view last = host.substr(host.rfind('.') + 1);

@@ -1,4 +1,4 @@
-// The running process and what its environment says.
+// The running process and its environment.
 #pragma once
 
 #include <optional>
@@ -8,22 +8,22 @@
 
 namespace pinwell::foundation {
 
-/// The last component of the name the process was started under.
+/// The last component of the name that the process was started with.
 std::string processName();
 
-/// Lets closed standard streams lead to /dev/null. What is opened next takes the lowest free number: a
-/// connection or a file would stand in a closed stream's place and get the messages. To be called before
-/// anything is opened.
+/// Opens closed standard streams on /dev/null. Otherwise the next opened connection or file
+/// would take the number of a closed stream, and get the messages. Call it before anything is
+/// opened.
 void occupyStandardStreams();
 
 /// A fresh UUID-like string (RFC 9562, version 4), upper case, from the kernel's random source.
 std::string globallyUniqueString();
 
-/// $TMPDIR when it is set and absolute, else /tmp.
+/// $TMPDIR if it is set and absolute, otherwise /tmp.
 URL temporaryDirectory();
 
-/// The variable's value, unless the process runs with more rights than its caller (set-user-ID), in which
-/// case nothing the caller set is listened to. Nothing when it is unset.
+/// The variable's value. Returns `nullopt` if it is unset, or if the process has more rights than its caller
+/// (set-user-ID), whose environment is then not trusted.
 std::optional<std::string> secureEnvironment(const char* name);
 
 /// Whether `identifier` can be one file name here: not empty, at most 200 bytes, not "." or "..", without a

@@ -25,7 +25,7 @@ struct NotInAPropertyList {
     std::string_view what;
 };
 
-// Writes one value a line, indented by its depth.
+// Writes one value on each line, indented by its depth.
 class PropertyListWriter {
   public:
     std::string write(const Value& root) {
@@ -73,7 +73,7 @@ class PropertyListWriter {
         line(depth, isArray ? "</array>" : "</dict>");
     }
 
-    // XML has no way to write most control characters, not even escaped, nor U+FFFE and U+FFFF.
+    // XML cannot represent most control characters, not even escaped, nor U+FFFE and U+FFFF.
     static std::string escaped(std::string_view text) {
         if (!isUTF8(text) || text.find("\xEF\xBF\xBE") != std::string_view::npos ||
             text.find("\xEF\xBF\xBF") != std::string_view::npos)
@@ -89,7 +89,7 @@ class PropertyListWriter {
             else if (c == '>')
                 out += "&gt;";
             else if (c == '\r')
-                out += "&#13;";  // as it is, it would come back as a line feed
+                out += "&#13;";  // unescaped, it would be read as a line feed
             else
                 out += c;
         }

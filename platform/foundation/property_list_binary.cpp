@@ -14,8 +14,8 @@ namespace {
 constexpr std::size_t kBinaryTrailerSize = 32;
 constexpr unsigned kLengthFollows = 0xF;
 
-// Dates count seconds from 2001-01-01. This many to either side is three million years, and exact in a
-// double.
+// Dates count seconds from 2001-01-01. This many seconds in both directions are three million years, and
+// exact in a double.
 constexpr std::int64_t kDateEpoch = 978307200;
 constexpr double kLatestDate = 1e14;
 
@@ -32,7 +32,7 @@ enum class ObjectKind : unsigned {
     dictionary = 0xD,
 };
 
-// What one object comes to when everything below it is counted at every use.
+// The extent of an object, with everything below it counted at every reference.
 struct ObjectExtent {
     unsigned height = 0;  // 1 for a leaf
     std::uint64_t values = 0;
@@ -106,7 +106,7 @@ class BinaryListReader {
 
   private:
     struct Object {
-        ObjectExtent extent;  // height 0 until it has been read
+        ObjectExtent extent;  // height 0 before it is read
         Value value;
     };
 
@@ -125,7 +125,7 @@ class BinaryListReader {
     std::uint64_t root_ = 0;
     std::uint64_t tableOffset_ = 0;
     std::uint64_t references_ = 0;  // followed so far
-    std::vector<Object> known_;     // containers, by object; others are read at every use
+    std::vector<Object> known_;     // containers, by object; others are read at every reference
 };
 
 void BinaryListReader::readTrailer() {
@@ -170,7 +170,7 @@ std::uint64_t BinaryListReader::readLength(ByteReader& reader, unsigned low) {
     return sizedInteger(reader, 1U << (marker & 0xFU), "length");
 }
 
-// Integers of 8 bytes have a sign, shorter ones have none.
+// Integers of 8 bytes are signed, shorter ones unsigned.
 Value BinaryListReader::readSimple(ByteReader& reader, ObjectKind kind, unsigned low) {
     const std::size_t at = reader.position() - 1;
     switch (kind) {
@@ -198,7 +198,7 @@ Value BinaryListReader::readSimple(ByteReader& reader, ObjectKind kind, unsigned
     }
 }
 
-// Text, data and what has no length. Text of the one-byte form comes as it is, which may be no UTF-8.
+// Text, data and objects without a length. Text of the one-byte form is not converted, and may not be UTF-8.
 BinaryListReader::Object BinaryListReader::readContents(ByteReader& reader, ObjectKind kind,
                                                         unsigned low) const {
     if (kind != ObjectKind::data && kind != ObjectKind::ascii && kind != ObjectKind::utf16)
@@ -222,7 +222,8 @@ BinaryListReader::Object BinaryListReader::readContainer(ByteReader& reader, std
                                                          bool isDictionary, unsigned depth) {
     if (count > reader.remaining() / (isDictionary ? 2U : 1U) / referenceWidth_)
         refuseBinary(reader.position(), "more references than bytes");
-    // Objects may overlap, so the references of all of them are bounded together, not by the list's length.
+    // Objects may overlap, so the list's length does not bound their references; this limit bounds them
+    // together.
     references_ += isDictionary ? 2 * count : count;
     if (references_ > kMaximumPropertyListValues) refuseBinarySize("holds too many values");
     const std::size_t at = reader.position();
@@ -250,7 +251,7 @@ BinaryListReader::Object BinaryListReader::readContainer(ByteReader& reader, std
     return {total, std::move(elements)};
 }
 
-// Recursion is bounded by the depth limit, which a cycle runs into as well.
+// The depth limit bounds the recursion; a cycle reaches the limit too.
 BinaryListReader::Object BinaryListReader::read(std::uint64_t object, unsigned depth) {
     if (object >= known_.size()) refuseBinary(0, "reference to no object");
     const Object& known = known_[static_cast<std::size_t>(object)];

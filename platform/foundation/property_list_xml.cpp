@@ -46,7 +46,7 @@ std::string_view trimmed(std::string_view text) {
     return text.substr(0, text.find_last_not_of(kXMLWhiteSpace) + 1);
 }
 
-// All of the text, or `nullopt`.
+// The number in the whole text, or `nullopt`.
 template <class Number, class... Options>
 std::optional<Number> numberOf(std::string_view text, Options... options) {
     Number number{};
@@ -55,7 +55,7 @@ std::optional<Number> numberOf(std::string_view text, Options... options) {
     return number;
 }
 
-// Decimal, or hexadecimal behind "0x"; with a sign.
+// Decimal, or hexadecimal after "0x"; with a sign.
 std::optional<Value> integerOf(std::string_view text) {
     constexpr int kDecimal = 10;
     constexpr int kHexadecimal = 16;
@@ -120,12 +120,12 @@ class XMLList final : public XMLEvents {
     }
 
   private:
-    // An element that has begun.
+    // An open element.
     struct Open {
         ElementKind kind;
         Array elements;
         Dictionary members;
-        std::optional<std::string> key;  // of the member that comes next
+        std::optional<std::string> key;  // of the next member
     };
 
     [[noreturn]] void refuse(std::string_view what) const { refuse(what, parser_.offset()); }
@@ -226,7 +226,7 @@ class XMLList final : public XMLEvents {
 
     XMLParser parser_{*this, XMLParser::DocumentType::withoutDeclarations};
     std::vector<Open> open_;
-    std::string text_;  // of the leaf that has begun
+    std::string text_;  // of the open leaf
     std::optional<Value> root_;
     std::size_t values_ = 0;
 };

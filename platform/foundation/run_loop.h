@@ -1,4 +1,4 @@
-// Where a thread waits while other threads do the work.
+// A loop in which a thread waits while other threads work.
 #pragma once
 
 #include <condition_variable>
@@ -8,13 +8,13 @@ namespace pinwell::foundation {
 
 class RunLoop {
   public:
-    /// Parks the calling thread until stop(). A process that is ended from elsewhere never returns from here.
+    /// Blocks the calling thread until stop(). Never returns if another thread ends the process.
     void run() {
         std::unique_lock lock(mutex_);
         changed_.wait(lock, [this] { return stopped_; });
     }
 
-    /// Lets run() return, now or when it is called. From any thread.
+    /// Makes run() return, at once or when it is called. From any thread.
     void stop() {
         const std::lock_guard lock(mutex_);
         stopped_ = true;

@@ -1,4 +1,4 @@
-// Whether this is a build with a sanitizer that has stacks, handlers, children or reports of its own.
+// Whether this build has a sanitizer with its own stacks, handlers, children or reports.
 #pragma once
 
 namespace pinwell::foundation {

@@ -1,4 +1,4 @@
-// Reading keys and passphrases into room that is wiped. No other place gets the bytes.
+// Reads keys and passphrases into buffers that are wiped. No other memory gets the bytes.
 #pragma once
 
 #include <array>
@@ -11,10 +11,10 @@
 
 namespace pinwell::foundation {
 
-/// Overwrites the bytes; the compiler cannot leave it out.
+/// Overwrites the bytes; the compiler cannot remove the call.
 void wipe(std::span<std::byte> bytes) noexcept;
 
-/// Room that is wiped when it goes.
+/// A buffer that is wiped when it is destroyed.
 template <std::size_t count>
 class WipedRoom {
   public:
@@ -33,12 +33,12 @@ class WipedRoom {
 /// path.
 Result<FileDescriptor> openSecret(const std::string& path);
 
-/// Reads to the end of the file or of the room, and returns how many bytes there were. The error is of
+/// Reads to the end of the file or of the buffer, and returns the number of bytes. The error is of
 /// kPOSIXErrorDomain and names the path.
 Result<std::size_t> readSecret(const FileDescriptor& file, const std::string& path,
                                std::span<std::byte> room);
 
-/// The same of a whole file that is shorter than the room. A longer one is an error (EFBIG).
+/// The same for a whole file that is shorter than the buffer. A longer file is an error (EFBIG).
 Result<std::size_t> readSecretFile(const std::string& path, std::span<std::byte> room);
 
 }  // namespace pinwell::foundation

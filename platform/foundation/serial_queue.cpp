@@ -59,7 +59,7 @@ void SerialQueue::run() {
         work_.pop_front();
         lock.unlock();
         work();
-        work = nullptr;  // what it owned goes while the queue is unlocked, and may still hand in work
+        work = nullptr;  // freed while the queue is unlocked: destructors may still queue work
         lock.lock();
     }
 }

@@ -1,4 +1,4 @@
-// A serial queue: blocks of work run one after another on a thread of the queue's own.
+// A serial queue: blocks of work run one after another on the queue's own thread.
 #pragma once
 
 #include <condition_variable>
@@ -10,18 +10,18 @@
 
 namespace pinwell::foundation {
 
-/// Work runs in the order in which it was handed in, never two pieces at once.
-/// Destruction runs what is queued, then joins; it must not happen on the queue's own thread.
-/// An exception that leaves a piece of work ends the process.
+/// Work runs in the order of the calls, one piece at a time.
+/// The destructor runs the queued work, then joins; never destroy it on the queue's own thread. An exception
+/// that leaves a piece of work ends the process.
 class SerialQueue {
   public:
-    /// Throws std::system_error when there is no thread to be had.
+    /// Throws std::system_error if no thread can be started.
     explicit SerialQueue(std::string name);
     ~SerialQueue();
     SerialQueue(const SerialQueue&) = delete;
     SerialQueue& operator=(const SerialQueue&) = delete;
 
-    /// Queues `work` and returns. May be called from any thread, the queue's own included.
+    /// Queues `work` and returns. May be called from any thread, even the queue's own.
     void async(std::function<void()> work);
 
     /// Queues `work` and waits until it has run. On the queue's own thread it runs at once.

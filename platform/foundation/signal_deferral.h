@@ -1,14 +1,14 @@
-// Signals that would end the process, put off until something is finished that must not be left half done.
+// Defers signals that would end the process until a write or another critical step is complete.
 #pragma once
 
 namespace pinwell::foundation {
 
-/// For as long as it lives, SIGHUP, SIGINT, SIGTERM and SIGXCPU have no effect; those that came have it when
-/// it dies. A signal that the process ignores stays ignored.
+/// While it lives, SIGHUP, SIGINT, SIGTERM and SIGXCPU have no effect; signals that came take effect when it
+/// is destroyed. A signal that the process ignores stays ignored.
 ///
-/// It changes what the signals do, and not which are blocked: a mask is each thread's own, and a signal that
-/// is meant for the process ends it through any thread that does not block it, a parked main thread for
-/// instance. The process has one set of dispositions, so there must be one deferral at a time.
+/// It changes the signals' handlers, not the masks. Each thread has its own mask, and a signal ends the
+/// process through any thread that does not block it, for example a waiting main thread. A process has one
+/// set of handlers, so there must be only one deferral at a time.
 class SignalDeferral {
   public:
     SignalDeferral();

@@ -11,7 +11,7 @@
 namespace pinwell::foundation {
 namespace {
 
-/// What memory comes in; a larger page of the system's makes the saving smaller and nothing else.
+/// The usual page size; on a system with larger pages only the saving is smaller.
 constexpr std::size_t kPage = 4096;
 
 bool isZero(ByteView bytes) {
@@ -29,7 +29,7 @@ SparseBuffer::SparseBuffer(std::size_t length) {
     void* const start =
         mmap(nullptr, length, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
     if (start == MAP_FAILED) throw std::bad_alloc();
-    // A huge page would take 2 MiB for the first byte in it. Advice only: without it the buffer is as good.
+    // A huge page would take 2 MiB for the first byte in it. Only advice: without it the buffer works too.
     static_cast<void>(madvise(start, length, MADV_NOHUGEPAGE));
     start_ = {static_cast<std::byte*>(start), Unmapping{length}};
 }

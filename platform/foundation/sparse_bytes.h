@@ -1,8 +1,8 @@
 // Long byte buffers that are mostly zeros, or are needed in several places.
 //
-// A length in a file is a claim: a sparse file has gibibytes of zeros with nothing on disk. A SparseBuffer of
-// that length takes address space, and memory only for the pages that something other than zeros was put
-// into.
+// A length in a file is only a claim: a sparse file has gibibytes of zeros and uses no disk space.
+// A SparseBuffer of that length takes address space, and memory only for pages with non-zero
+// bytes.
 #pragma once
 
 #include <cstddef>
@@ -12,7 +12,7 @@
 
 namespace pinwell::foundation {
 
-/// Gives the pages of a buffer back.
+/// Unmaps the pages of a buffer.
 struct Unmapping {
     std::size_t length = 0;
     void operator()(std::byte* start) const noexcept;
@@ -29,7 +29,7 @@ class SparseBuffer {
     std::size_t size() const noexcept { return start_ ? start_.get_deleter().length : 0; }
     ByteView view() const noexcept { return {start_.get(), size()}; }
 
-    /// Copies `bytes` to `offset`, where nothing was put before. Whole pages of zeros are left out. Throws
+    /// Copies `bytes` to `offset`, where nothing was put before. Skips whole pages of zeros. Throws
     /// std::out_of_range if the bytes do not fit.
     void put(std::size_t offset, ByteView bytes);
 
@@ -37,12 +37,12 @@ class SparseBuffer {
     std::unique_ptr<std::byte, Unmapping> start_;
 };
 
-/// Bytes that do not change, and their owner: copies and parts are cheap, and keep the whole alive.
+/// Immutable bytes with a shared owner: copies and parts are cheap, and keep the whole alive.
 class SharedBytes {
   public:
     SharedBytes() = default;
 
-    // Implicit: wherever shared bytes are wanted, a buffer of one's own will do.
+    // Implicit: a buffer may be passed wherever shared bytes are expected.
     SharedBytes(Data bytes);             // NOLINT(google-explicit-constructor)
     SharedBytes(SparseBuffer&& buffer);  // NOLINT(google-explicit-constructor)
 

@@ -15,16 +15,17 @@
 namespace pinwell::foundation {
 namespace {
 
-// Room for a handler and what it calls.
+// Stack for a handler and the functions that it calls.
 constexpr std::size_t kHandlerStack = std::size_t{64} * 1024;
 
-// How far beyond the end one call can reach: the kernel keeps a gap of 1 MiB below the main thread's stack.
+// The distance beyond the end that one call can reach: the kernel keeps a gap of 1 MiB below the main
+// thread's stack.
 constexpr std::uintptr_t kReach = std::uintptr_t{1024} * 1024;
 
 // The lowest address of the thread's stack; 0 without a guard.
 thread_local std::uintptr_t lowest = 0;
 
-// The kernel lets the main thread's stack grow down from its top to the limit. At the very top, behind the
+// The kernel lets the main thread's stack grow down from its top to the limit. At the very top, after the
 // program's file name, is one word. pthread_getattr_np(3) would read all of /proc/self/maps to find the top.
 std::uintptr_t endOfMainStack() {
     const auto fileName = static_cast<std::uintptr_t>(getauxval(AT_EXECFN));

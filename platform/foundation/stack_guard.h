@@ -1,8 +1,8 @@
-// Stacks that tell when they are used up.
+// Detects that a thread has used up its stack.
 //
-// A thread that goes beyond its stack faults, and its fault handler has nowhere to run. A guard gives the
-// thread a second stack for handlers, and remembers where its own one ends, so that a handler can tell this
-// fault from others.
+// A thread that exceeds its stack faults, and its fault handler has no stack to run on. A guard gives the
+// thread a second stack for handlers, and remembers the end of its own stack, so that a handler can recognise
+// this fault.
 #pragma once
 
 #include <cstddef>
@@ -10,9 +10,9 @@
 
 namespace pinwell::foundation {
 
-/// Guards the thread that makes it, for as long as it lives. One a thread. A main thread's guard goes by the
-/// limit on stacks at that time, and cannot tell the end of a stack without a limit. Does nothing in builds
-/// with sanitizers, which have such stacks of their own.
+/// Guards the thread that makes it, while it lives. One for each thread. A main thread's guard uses the stack
+/// limit at that time, and does not work without a limit. Does nothing in builds with sanitizers, which have
+/// their own handler stacks.
 class StackGuard {
   public:
     StackGuard();
@@ -20,7 +20,7 @@ class StackGuard {
     StackGuard(const StackGuard&) = delete;
     StackGuard& operator=(const StackGuard&) = delete;
 
-    /// Whether `address` is where the calling thread faults when it goes beyond its stack. False for a thread
+    /// Whether a fault at `address` means that the calling thread exceeded its stack. False for a thread
     /// without a guard. May be called in a signal handler.
     static bool isBeyondStack(const void* address) noexcept;
 

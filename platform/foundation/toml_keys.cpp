@@ -31,7 +31,7 @@ class KeyScan {
     }
 
   private:
-    /// False if it has no end.
+    /// Returns false if it is unterminated.
     bool skipString(char quote) {
         const std::string three(3, quote);
         const bool isLong = rest_.starts_with(three);
@@ -40,7 +40,7 @@ class KeyScan {
             const char c = rest_.front();
             if (isLong ? rest_.starts_with(three) : c == quote) {
                 rest_.remove_prefix(isLong ? 3 : 1);
-                // Up to two more of them belong to a long string.
+                // Up to two more quotes belong to a long string.
                 for (int i = 0; isLong && i < 2 && rest_.starts_with(quote); ++i) rest_.remove_prefix(1);
                 return true;
             }

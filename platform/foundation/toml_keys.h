@@ -1,4 +1,4 @@
-// A check of TOML documents that comes before their parser.
+// // A check of TOML documents before they are parsed.
 #pragma once
 
 #include <optional>
@@ -6,10 +6,10 @@
 
 namespace pinwell::foundation {
 
-/// The line of the first key, or table's name, of more than `parts` parts ("a.b.c" has three), outside of
-/// strings and comments; `nullopt` if there is none. toml++ has no limit of its own: it makes a table for
-/// each part, and frees tables inside one another by recursion. (Of arrays and inline tables it takes 256.)
-/// What follows an unfinished string is left alone: the parser does not get there.
+/// The line of the first key or table name with more than `parts` parts ("a.b.c" has three), outside of
+/// strings and comments; `nullopt` if there is none. toml++ has no such limit: it makes a table for each
+/// part, and frees nested tables by recursion. (It limits arrays and inline tables to 256.) Stops at an
+/// unterminated string, because the parser stops there too.
 std::optional<unsigned> lineOfLongTomlKey(std::string_view document, unsigned parts);
 
 }  // namespace pinwell::foundation

@@ -88,8 +88,8 @@ URL URL::fileURLWithPath(std::string_view path) {
     } else {
         std::error_code failure;
         const std::filesystem::path current = std::filesystem::current_path(failure);
-        // A directory that was removed has no path any more. The kernel's link to it leads where a relative
-        // path would; hung below the root, the path could lead to some other file.
+        // A removed directory no longer has a path. The kernel's link to it leads to the same place as a
+        // relative path; relative to the root, the path could name another file.
         url.path_ = tidyPath((failure ? "/proc/self/cwd" : current.native()) + "/" + std::string(path));
     }
     return url;

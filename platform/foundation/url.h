@@ -7,26 +7,26 @@
 
 namespace pinwell::foundation {
 
-/// An absolute location. A file URL is kept as its path, byte for byte (file names need not be UTF-8), and is
-/// percent-encoded only when it is described. Any other URL is kept as the text it was made from.
-/// Immutable; copies are cheap enough to pass by value.
+/// An absolute location. A file URL is stored as its path, byte for byte (file names need not be UTF-8), and
+/// is percent-encoded only for display. Any other URL is stored as its original text. Immutable; copies are
+/// cheap enough to pass by value.
 class URL {
   public:
-    /// A relative path is taken against the current directory, under "/proc/self/cwd" when that has no path.
-    /// Trailing slashes, doubled slashes and "." components are dropped; ".." stays, since what it means
-    /// depends on links. An empty path stays empty and names nothing.
+    /// A relative path starts at the current directory, or at "/proc/self/cwd" if that has no path. Trailing
+    /// slashes, doubled slashes and "." components are dropped; ".." stays, because its meaning depends on
+    /// links. An empty path stays empty and names nothing.
     static URL fileURLWithPath(std::string_view path);
 
-    /// Nothing when `text` has no scheme, or holds a space, a control character, a character that RFC 3986
-    /// allows nowhere, or a malformed percent escape; nor when a web address has no host.
+    /// Returns `nullopt` if `text` has no scheme, or contains a space, a control character, a character that
+    /// RFC 3986 never allows, or a malformed percent escape, or if a web address has no host.
     static std::optional<URL> fromString(std::string_view text);
 
     bool isFileURL() const noexcept { return isFile_; }
 
-    /// The file-system path of a file URL; of another URL, its path component, still percent-encoded.
+    /// The file-system path of a file URL; for another URL, its path component, still percent-encoded.
     const std::string& path() const noexcept { return path_; }
 
-    /// "file:///a%20b" for a file, the text it was made from otherwise.
+    /// "file:///a%20b" for a file, otherwise the original text.
     std::string absoluteString() const;
 
     /// The scheme in lower case.
@@ -37,13 +37,13 @@ class URL {
 
     std::string lastPathComponent() const;
 
-    /// The last component's, as pathExtensionOfName has it.
+    /// The last component's extension, as in pathExtensionOfName.
     std::string pathExtension() const;
 
-    /// A URL that names nothing stays as it is. The component is a name as the file system has it.
+    /// A URL that names nothing is returned unchanged. The component is a file name, not percent-encoded.
     URL appendingPathComponent(std::string_view component) const;
 
-    /// Of a file; another URL stays as it is.
+    /// For a file; another URL is returned unchanged.
     URL deletingLastPathComponent() const;
 
     bool operator==(const URL&) const = default;
@@ -58,8 +58,8 @@ class URL {
     std::string text_;  // empty for a file
 };
 
-/// Of a file name: the part behind its last dot, without the dot; empty when there is none, or when the last
-/// dot begins or ends the name.
+/// The part of a file name after its last dot, without the dot; empty if there is none, or if the last dot
+/// begins or ends the name.
 std::string_view pathExtensionOfName(std::string_view name) noexcept;
 
 }  // namespace pinwell::foundation

@@ -3,8 +3,8 @@
 namespace pinwell::foundation {
 namespace {
 
-// What may follow a lead byte: how many bytes the sequence has, and the range of the second one, which is
-// what keeps out overlong forms (E0, F0), surrogates (ED) and values past the last code point (F4).
+// The bytes after a lead byte: the length of the sequence, and the range of the second byte. This range
+// excludes overlong forms (E0, F0), surrogates (ED) and values past the last code point (F4).
 struct Sequence {
     std::size_t length = 0;
     unsigned char low = 0x80;

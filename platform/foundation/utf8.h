@@ -6,7 +6,7 @@
 
 namespace pinwell::foundation {
 
-/// Length in bytes of the well-formed sequence at the front of `text`; 0 when there is none.
+/// Length in bytes of the well-formed sequence at the start of `text`; 0 if there is none.
 std::size_t utf8SequenceLength(std::string_view text) noexcept;
 
 bool isUTF8(std::string_view text) noexcept;

@@ -84,7 +84,7 @@ const Value& Value::operator[](std::size_t index) const {
 
 bool Value::operator==(const Value& other) const {
     if (content_.index() != other.content_.index()) {
-        // One number, two representations: 1 and 1u are equal.
+        // A number may have two representations: 1 and 1u are equal.
         const auto integral = [](const Value& value) {
             return std::holds_alternative<std::int64_t>(value.content_) ||
                    std::holds_alternative<std::uint64_t>(value.content_);

@@ -1,4 +1,4 @@
-// Dynamically typed values: what JSON, property lists, user defaults and resource properties hold.
+// Dynamically typed values of JSON, property lists, user defaults and resource properties.
 #pragma once
 
 #include <cstdint>
@@ -17,7 +17,7 @@ namespace pinwell::foundation {
 
 class Error;
 
-/// A value was asked for something its kind does not have (an element of a string, say).
+/// Thrown if a value's kind does not support an operation (an element of a string, for example).
 class ValueTypeError : public std::runtime_error {
   public:
     using std::runtime_error::runtime_error;
@@ -25,9 +25,9 @@ class ValueTypeError : public std::runtime_error {
 
 /// Nil, a JSON null, or one immutable value. Containers are shared, never copied.
 ///
-/// The subscripts follow the platform's objects: a question put to nil is answered with nil, a key that a
-/// dictionary does not hold is nil, and a question that the kind cannot answer is an error (ValueTypeError;
-/// std::out_of_range for an index past the end).
+/// The subscripts follow the platform's objects: a subscript of nil is nil, and so is a missing key of a
+/// dictionary. A subscript that the kind does not support is an error (ValueTypeError; std::out_of_range for
+/// an index past the end).
 class Value {
   public:
     struct Null {
@@ -57,7 +57,7 @@ class Value {
 
     bool isNil() const noexcept { return std::holds_alternative<std::monostate>(content_); }
     bool isNull() const noexcept { return std::holds_alternative<Null>(content_); }
-    bool isNumber() const noexcept;  // bool included, as on the platform
+    bool isNumber() const noexcept;  // also for bool, as on the platform
 
     /// Null unless the value is of that kind.
     const std::string* string() const noexcept { return std::get_if<std::string>(&content_); }
@@ -72,17 +72,17 @@ class Value {
     const std::uint64_t* unsignedInteger() const noexcept { return std::get_if<std::uint64_t>(&content_); }
     const double* real() const noexcept { return std::get_if<double>(&content_); }
 
-    /// The number as an unsigned word: negative integers wrap, fractions are cut, what does not fit
-    /// saturates; 0 for whatever is not a number.
+    /// The number as an unsigned word: negative integers wrap, fractions are cut, large values saturate; 0
+    /// for anything except a number.
     std::uint64_t unsignedIntegerValue() const noexcept;
 
-    /// Whether the number is not zero; false for whatever is not a number.
+    /// Whether the number is not zero; false for anything except a number.
     bool boolValue() const noexcept;
 
     const Value& operator[](std::string_view key) const;
     const Value& operator[](std::size_t index) const;
 
-    /// The description as it stands inside an array or dictionary (foundation::describe gives the one by
+    /// The description inside an array or dictionary (foundation::describe returns the description by
     /// itself).
     std::string describe(unsigned indent) const;
 

@@ -1,5 +1,5 @@
-// The names of foundation/value.h, for headers that only pass values on: an edit of value.h builds again what
-// looks into a value, and nothing else.
+// The names of foundation/value.h, for headers that only pass values on. So an edit of value.h rebuilds only
+// sources that read values.
 #pragma once
 
 #include <functional>

@@ -19,13 +19,13 @@ namespace {
 
 static_assert(std::is_same_v<XML_Char, char>, "the library is built for UTF-8");
 
-// A tag or a comment that is not whole is gone over again with each piece that comes after it.
+// The library parses an incomplete tag or comment again with each further piece.
 constexpr std::size_t kPieceSize = std::size_t{256} * 1024;
 
 constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
 
-// The library's allocator gets no context, so the memory that is left is that of the document whose piece
-// this thread is parsing. A block begins with its size.
+// The library's allocator gets no context, so this holds the remaining memory of the document that this
+// thread is parsing. A block begins with its size.
 thread_local std::size_t* memoryLeft = nullptr;
 
 struct alignas(std::max_align_t) BlockHeader {
@@ -56,7 +56,7 @@ void* reallocate(void* memory, std::size_t size) {
     return larger;
 }
 
-// Has the library allocate from `left` as long as this lives.
+// Makes the library allocate from `left` while this lives.
 class Allowance {
   public:
     explicit Allowance(std::size_t& left) : before_(std::exchange(memoryLeft, &left)) {}
@@ -94,7 +94,7 @@ class XMLParser::Library {
     }
 
     void feed(ByteView bytes) {
-        // Most pieces come whole, or are put together from smaller ones.
+        // Pieces are passed on whole, or joined from smaller ones.
         while (!bytes.empty()) {
             const std::size_t count = std::min(bytes.size(), kPieceSize - pending_);
             std::transform(bytes.begin(), bytes.begin() + static_cast<std::ptrdiff_t>(count),
@@ -140,7 +140,7 @@ class XMLParser::Library {
         });
     }
 
-    // Nothing may be thrown through the library, which is C. It may go on for an event after it was stopped.
+    // No exception may pass through the library, which is C. It may send another event after it was stopped.
     template <class Action>
     static void guarded(void* library, Action action) noexcept {
         Library& self = *static_cast<Library*>(library);
@@ -157,7 +157,7 @@ class XMLParser::Library {
         throw MalformedXML(offset(), what);
     }
 
-    // Null for a version or an encoding that is not given.
+    // Null for a missing version or encoding.
     void declaration(const char* version, const char* encoding) {
         if (version == nullptr || !std::string_view(version).starts_with("1.")) refuse("version of XML");
         if (encoding == nullptr || equalIgnoringCase(encoding, "UTF-8")) return;
@@ -171,7 +171,7 @@ class XMLParser::Library {
         if (hasDeclarations) refuse("document type with an internal subset");
     }
 
-    // UTF-16, which the library would tell by these bytes, declared or not.
+    // UTF-16, which the library would recognise by these bytes, with or without a declaration.
     void examineStart() {
         const std::string_view start(piece_.data(), std::min(pending_, kByteOrderMark.size()));
         isMarked_ = start == kByteOrderMark;

@@ -1,17 +1,17 @@
-// XML documents, event by event: the only way from input to the XML library.
+// XML documents, event by event: the only use of the XML library on input.
 //
-// The library works in linear time as long as a document declares nothing and what it must see whole (a tag,
-// a comment, a processing instruction) is short against the pieces that it is given; and it remembers every
-// distinct name. So it gets pieces of this file's choosing, and a fixed amount of memory.
+// The library works in linear time under two conditions. The document declares nothing, and each unit (a tag,
+// a comment, a processing instruction) is short compared with the pieces of input. It also remembers every
+// distinct name. So this file chooses the pieces, and gives the library a fixed amount of memory.
 //
-// Encodings: UTF-8, ISO-8859-1 or US-ASCII, as declared; UTF-8 without a declaration. Every text comes out in
-// UTF-8. Names come as they are written: name spaces are not looked at, and their declarations are
+// Encodings: UTF-8, ISO-8859-1 or US-ASCII, as declared; UTF-8 without a declaration. Every text is passed
+// on in UTF-8. Names are passed on as written: name spaces are ignored, and their declarations are
 // attributes.
 //
-// Refused: what is not well-formed; another encoding, and a byte order mark of UTF-8 before the declaration
-// of another; a document type, or one with declarations inside, as the caller wishes; references to entities
-// other than the five that need no declaration; and what needs more than kMaximumXMLMemory. Nothing but the
-// document is ever read.
+// Refused: documents that are not well-formed; another encoding, and a UTF-8 byte order mark before the
+// declaration of another; a document type, or one with declarations inside, as the caller chooses; references
+// to entities other than the five predefined ones; and documents that need more than kMaximumXMLMemory.
+// Nothing outside the document is ever read.
 #pragma once
 
 #include <cstdint>
@@ -26,10 +26,10 @@
 
 namespace pinwell::foundation {
 
-/// What the library may allocate for one document: names, and twice the longest tag or comment.
+/// Memory limit of the library for one document: names, and twice the longest tag or comment.
 inline constexpr std::size_t kMaximumXMLMemory = 4 * 1024 * 1024;
 
-/// The document is refused. Ends the parse.
+/// Thrown for a refused document. Ends the parse.
 class MalformedXML : public std::runtime_error {
   public:
     MalformedXML(std::uint64_t offset, const std::string& what) : std::runtime_error(what), offset_(offset) {}
@@ -44,17 +44,17 @@ class MalformedXML : public std::runtime_error {
 /// The attributes of one element. Valid during the event.
 class XMLAttributes {
   public:
-    /// Names and values by turns, as the library lays them out, and a null pointer at the end.
+    /// Alternating names and values, as the library passes them, and a null pointer at the end.
     explicit XMLAttributes(const char* const* words) : words_(words) {}
 
-    /// `nullopt` if there is none of that name.
+    /// `nullopt` if there is no attribute of that name.
     std::optional<std::string_view> operator[](std::string_view name) const;
 
   private:
     const char* const* words_;
 };
 
-/// What a document is made of, in its order. What an event throws ends the parse and comes out of it.
+/// The parts of a document, in its order. An exception of an event ends the parse and leaves it.
 class XMLEvents {
   public:
     virtual ~XMLEvents() = default;
@@ -62,12 +62,12 @@ class XMLEvents {
     virtual void begin(std::string_view name, const XMLAttributes& attributes) = 0;
     virtual void end(std::string_view name) = 0;
 
-    /// A piece of character data; one text may come in several, and marked sections are not told apart.
+    /// A piece of character data. One text may come in several pieces; marked sections look the same.
     virtual void text(std::string_view piece) = 0;
 };
 
 /// Reads one document. After an exception it must not be used again. Throws MalformedXML, std::bad_alloc and
-/// what the events throw.
+/// the events' exceptions.
 class XMLParser {
   public:
     enum class DocumentType { refused, withoutDeclarations };
@@ -80,10 +80,10 @@ class XMLParser {
 
     void feed(ByteView bytes);
 
-    /// Once, and last.
+    /// Call it once, and last.
     void finish();
 
-    /// Where the event that goes on began, in bytes from the start of the document.
+    /// The start of the current event, in bytes from the start of the document.
     std::uint64_t offset() const;
 
   private:
