@@ -10,10 +10,10 @@
 namespace pinwell::files {
 namespace {
 
-// One block of every file system in use, and of no file system more than it can look at.
+// A block of every common file system, and small enough for every file system's limit.
 constexpr std::uint64_t kRange = 4096;
 
-// Refused for lack of the feature, before the arguments are looked at.
+// Refused because the feature is missing, before the arguments are checked.
 bool meansNo(int reason) {
     switch (reason) {
         case EOPNOTSUPP:
@@ -26,14 +26,14 @@ bool meansNo(int reason) {
     }
 }
 
-// What a file system that has the feature says to two ranges that overlap, or to a file without a block.
+// The error of a file system with the feature, for two overlapping ranges or a file without a block.
 bool meansYes(int reason) {
     return reason == EINVAL;
 }
 
 enum class Answer { yes, no, unknown };
 
-// file_dedupe_range of linux/fs.h with its one destination, which the kernel's header leaves open.
+// file_dedupe_range of linux/fs.h with one destination; the kernel's header has an array of open length.
 struct SharingQuestion {
     std::uint64_t offset;
     std::uint64_t length;
@@ -48,21 +48,21 @@ struct SharingQuestion {
 };
 static_assert(sizeof(SharingQuestion) == sizeof(file_dedupe_range) + sizeof(file_dedupe_range_info));
 
-// ioctl_fideduperange(2) of the file's beginning with itself. A file that is open for reading will do.
+// ioctl_fideduperange(2) of the file's beginning with itself. A file open for reading is enough.
 Answer askForSharing(const OpenFile& file) {
-    // The kernel looks no further at an empty range, or at one that reaches past the end.
+    // The kernel does not ask the file system for an empty range, or a range past the end.
     if (file.status.st_size == 0) return Answer::unknown;
     SharingQuestion question{};
     question.length = std::min(kRange, static_cast<std::uint64_t>(file.status.st_size));
     question.destinationCount = 1;
     question.destination = file.number();
-    // No operation of that sort at all, in the file system's table of them.
+    // The file system has no such operation at all.
     if (uninterrupted([&] { return ioctl(file.number(), FIDEDUPERANGE, &question); }) != 0)
         return meansNo(errno) || errno == EINVAL ? Answer::no : Answer::unknown;
     const int status = question.status;
     if (status >= 0 || meansYes(-status)) return Answer::yes;
-    // EOPNOTSUPP is also the answer where files can be cloned but not compared first (NFS, CIFS); EPERM,
-    // where the file is somebody else's.
+    // EOPNOTSUPP is also returned if files can be cloned but not compared first (NFS, CIFS), and EPERM if the
+    // file is another user's.
     return Answer::unknown;
 }
 
@@ -79,8 +79,8 @@ Result<bool> askForCloning(const Place& place) {
     return lastError(place.path);
 }
 
-// A clone of the file's beginning into a file without a name, in the same directory. What is left when the
-// file may only be read, and somebody else's: its directory says then whether it can be replaced.
+// Clones the file's beginning into an unnamed file in the same directory. This is the last way if the file is
+// another user's and only readable: its directory then decides whether it can be replaced.
 Result<bool> tryCloning(const OpenFile& file) {
     const Place& place = file.place;
     const FileDescriptor probe(uninterrupted(

@@ -1,4 +1,4 @@
-// Clones: copies that share their blocks with the original until one of the two is written (reflinks, see
+// Clones: copies that share their blocks with the original until one of them is written (reflinks, see
 // ioctl_ficlonerange(2)). For this folder only.
 #pragma once
 
@@ -6,12 +6,12 @@
 
 namespace pinwell::files {
 
-/// Whether the file system can clone the file at `place`, found by asking for something that it can only
-/// refuse: to share the file's own beginning with itself. Nothing is changed, and as a rule nothing is made.
-/// An error is a question that could not be put.
+/// Whether the file system can clone the file at `place`. Requests an operation that must fail: sharing the
+/// file's beginning with itself. The error code gives the result. Changes nothing, and usually creates
+/// nothing. Returns an error if the probe itself fails.
 Result<bool> fileSupportsCloning(const Place& place);
 
-/// Makes the empty file `to` a clone of `from`. NO, with nothing lost but the attempt, when that cannot be.
+/// Makes the empty file `to` a clone of `from`. Returns false, without any change, if that is not possible.
 bool cloneFile(const OpenFile& from, const OpenFile& to);
 
 }  // namespace pinwell::files

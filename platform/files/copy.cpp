@@ -18,10 +18,10 @@ struct Extent {
     off_t end;
 };
 
-constexpr off_t kMaximumKernelCopy = off_t{1} << 30U;  // a call's limit is a little above that
+constexpr off_t kMaximumKernelCopy = off_t{1} << 30U;  // a call's limit is slightly larger
 
-// Lets the kernel do it as far as it will; answers where it stopped. Why does not matter: reading and writing
-// from there meets the same trouble, if there is any, and can tell whose it is.
+// Lets the kernel copy as much as it can; returns where it stopped. The reason does not matter: reading and
+// writing from there would meet the same error, and can tell which file it is from.
 off_t copyInKernel(const OpenFile& from, const OpenFile& to, Extent extent) {
     off_t in = extent.begin;
     off_t out = extent.begin;
@@ -51,7 +51,7 @@ Result<void> copyByHand(const OpenFile& from, const OpenFile& to, Extent extent)
         const std::size_t length = std::min(static_cast<std::size_t>(extent.end - at), piece.size());
         const ssize_t count = uninterrupted([&] { return pread(from.number(), piece.data(), length, at); });
         if (count < 0) return lastError(from.path());
-        // The file has been cut short since it was opened; what was copied so far is not its contents.
+        // The file was truncated after it was opened, so the copy so far is not its contents.
         if (count == 0) return Error::posix(EIO, from.path());
         const auto bytes = ByteView(piece).first(static_cast<std::size_t>(count));
         if (auto done = writeAt(to, bytes, at); !done) return done;
@@ -60,7 +60,7 @@ Result<void> copyByHand(const OpenFile& from, const OpenFile& to, Extent extent)
     return {};
 }
 
-// The next extent that holds data at or after `at`; an empty one at `size` when only a hole is left.
+// The next extent with data at or after `at`; an empty one at `size` if only a hole is left.
 Result<Extent> nextExtent(const OpenFile& from, off_t at, off_t size) {
     const off_t begin = uninterrupted([&] { return lseek(from.number(), at, SEEK_DATA); });
     if (begin < 0) {

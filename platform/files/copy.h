@@ -5,10 +5,10 @@
 
 namespace pinwell::files {
 
-/// As FileManager::copyItem. Holes stay holes where the file system tells them.
+/// Like FileManager::copyItem. Holes stay holes if the file system reports them.
 Result<void> copyFile(const Place& source, const Place& destination);
 
-/// As FileManager::copyContents.
+/// Like FileManager::copyContents.
 Result<void> copyFileContents(const Place& source, const Place& destination);
 
 }  // namespace pinwell::files

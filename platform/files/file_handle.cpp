@@ -17,7 +17,7 @@ namespace {
 bool exceedsFileSizeLimit(off_t from, off_t length) {
     rlimit limit{};
     if (getrlimit(RLIMIT_FSIZE, &limit) != 0 || limit.rlim_cur == RLIM_INFINITY) return false;
-    const auto end = static_cast<rlim_t>(from) + static_cast<rlim_t>(length);  // two that fit 63 bits
+    const auto end = static_cast<rlim_t>(from) + static_cast<rlim_t>(length);  // both fit 63 bits
     return end > limit.rlim_cur;
 }
 
@@ -37,7 +37,7 @@ class LocalFileHandle final : public FileHandle {
         return std::move(*data);
     }
 
-    // Where no hole can be found, there is none: SEEK_DATA is unknown, or the position is past the end.
+    // If SEEK_DATA is unknown, or the position is past the end, there is no hole.
     std::uint64_t nextData(std::uint64_t position) override {
         const std::uint64_t now = moveTo(0, SEEK_CUR);
         const off_t from = offset("seek in", position);
@@ -50,11 +50,11 @@ class LocalFileHandle final : public FileHandle {
     void reserve(std::uint64_t length) override {
         const off_t size = offset("reserve room in", length);
         const off_t from = offset("reserve room in", position());
-        // fallocate, which leaves the file as long as it is, does not ask for this one.
+        // fallocate does not change the file's length here, so it does not check this limit.
         if (exceedsFileSizeLimit(from, size)) fail("reserve room in", Error::posix(EFBIG, file_.path()));
         const int mode = FALLOC_FL_KEEP_SIZE;
         if (uninterrupted([&] { return fallocate(file_.number(), mode, from, size); }) == 0) return;
-        // No promise to be had here: the writing itself will tell.
+        // The file system cannot reserve: the write itself will show an error.
         if (errno == EOPNOTSUPP || errno == ENOSYS) return;
         fail("reserve room in", lastError(file_.path()));
     }
@@ -104,7 +104,7 @@ class LocalFileHandle final : public FileHandle {
 Result<std::unique_ptr<FileHandle>> openFileHandle(const Place& place, int access) {
     auto file = openRegularFile(place, access);
     if (!file) return file.error();
-    file->place.parent.reset();  // a handle needs the path alone, for its errors
+    file->place.parent.reset();  // a handle needs only the path, for its errors
     return std::unique_ptr<FileHandle>(std::make_unique<LocalFileHandle>(std::move(*file)));
 }
 

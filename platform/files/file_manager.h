@@ -1,9 +1,9 @@
-// Files as the tool handles them: questions about an item, safe copies and swaps, and file handles.
+// File operations of the tool: properties of an item, safe copies and swaps, and file handles.
 //
 // All calls block and may be made from any thread; one handle serves one thread at a time. Errors are of
-// kPOSIXErrorDomain and name the path; a URL that is no file's, or a path with a zero byte in it, is EINVAL.
-// Nothing is ever written through a symbolic link in the last path component, and nothing below a held item
-// is reached through one that leads out of it (EXDEV). Every file is opened close-on-exec.
+// kPOSIXErrorDomain and name the path; a URL that is not a file URL, or a path that contains a zero byte,
+// gives EINVAL. No write follows a symbolic link in the last path component. Below a held item, a link that
+// leads out of it is refused (EXDEV). Every file is opened close-on-exec.
 #pragma once
 
 #include <cstdint>
@@ -27,7 +27,7 @@ using foundation::Dictionary;
 using foundation::Result;
 using foundation::URL;
 
-/// What the path itself is; its last component's link is not followed.
+/// The facts about the path itself; a link in its last component is not followed.
 struct ItemFacts {
     std::string name;  // last path component
     bool isDirectory = false;
@@ -36,9 +36,9 @@ struct ItemFacts {
     bool isExecutable = false;  // any execute bit
 };
 
-/// What tells an item as it is now from the same path later: another file in its place, another length, other
-/// contents. Its mode, its links and its attributes do not count. A change that keeps the length, in the same
-/// tick of the file system's clock as the one before it (4 ms or so before Linux 6.13), does not show.
+/// The state of an item, to detect later changes at its path: another file, another length, other contents.
+/// Mode, links and attributes are not part of it. It misses a change of the same length within one tick of
+/// the file system's clock (about 4 ms before Linux 6.13).
 struct ItemState {
     std::uint64_t device = 0;
     std::uint64_t inode = 0;
@@ -49,7 +49,7 @@ struct ItemState {
     bool operator==(const ItemState&) const = default;
 };
 
-/// What the type service says of an item.
+/// The type of an item, from the type service.
 struct ItemType {
     std::string identifier;
     std::string localizedDescription;
@@ -57,7 +57,7 @@ struct ItemType {
     bool isApplication = false;
 };
 
-/// How the file manager asks for an item's type; put in by whoever builds it.
+/// The file manager's source of an item's type; passed in at construction.
 using TypeNaming = std::function<ItemType(const ItemFacts&)>;
 
 struct ResourceProperties {
@@ -72,35 +72,35 @@ struct ResourceProperties {
     Dictionary dictionary() const;
 };
 
-/// An open regular file that can be written to as well; what is written past its end leaves a hole. The
-/// operations throw FileHandleError; the destructor closes, and swallows what goes wrong then.
+/// An open regular file that can also be written; a write past its end leaves a hole. The operations throw
+/// FileHandleError; the destructor closes the file and ignores errors.
 class FileHandle : public FileReader {
   public:
-    /// Sees to it that the next `length` bytes from the position on will find room on the volume, where the
-    /// file system can promise that; the file is as long as before. A volume that is full says so here, while
-    /// nothing has been overwritten yet.
+    /// Reserves space on the volume for the next `length` bytes from the position on, if the file system
+    /// can. Does not change the file's length. So a full volume is detected here, before anything is
+    /// overwritten.
     virtual void reserve(std::uint64_t length) = 0;
 
     /// Writes all of `bytes`.
     virtual void write(ByteView bytes) = 0;
 
-    /// Cuts the file, or extends it with zeroes. The position stays where it is.
+    /// Cuts the file, or extends it with zeroes. The position does not change.
     virtual void truncate(std::uint64_t length) = 0;
 
     /// Returns when the file's data and metadata are on stable storage.
     virtual void synchronize() = 0;
 
-    /// Closes and reports. Further calls are errors; closing twice is none.
+    /// Closes and reports errors. Further calls are errors; closing twice is not.
     virtual void close() = 0;
 };
 
-/// Holds an item against other writers that ask, until it dies.
+/// An advisory lock on an item, until it is destroyed.
 class ItemLock {
   public:
     virtual ~ItemLock() = default;
 };
 
-/// Longest file that is ever read whole: no ticket, nor anything else that is read so, comes near it.
+/// Longest file that is read whole: tickets and other such files are far smaller.
 inline constexpr std::uint64_t kMaximumWholeFile = 64ULL * 1024 * 1024;
 
 class FileManager {
@@ -110,71 +110,71 @@ class FileManager {
     /// The six properties in one request.
     virtual Result<ResourceProperties> resourceProperties(const URL& item) = 0;
 
-    /// The item itself, not what a link leads to.
+    /// The item itself, not the target of a link.
     virtual Result<bool> isRegularFile(const URL& item) = 0;
 
-    /// The item itself, not what a link leads to.
+    /// The item itself, not the target of a link.
     virtual Result<ItemState> stateOfItem(const URL& item) = 0;
 
-    /// An advisory lock (flock(2), exclusive) on the file or directory that the path names once the lock is
-    /// had, whatever stood there when the waiting began. It does not block processes that do not take it:
-    /// file systems that would make it do so (CIFS, SMB) are refused with EOPNOTSUPP. Calls `waiting` once if
-    /// another process holds the lock, and waits for a minute at most (EBUSY). Other errors say that there is
-    /// nothing to lock, or that its file system knows no locks.
+    /// An advisory lock (flock(2), exclusive) on the file or directory that the path names when the lock is
+    /// taken, even if the path named another one when the wait began. It does not block processes that do not
+    /// take it: file systems that would enforce it (CIFS, SMB) are refused with EOPNOTSUPP. Calls `waiting`
+    /// once if another process holds the lock, and waits for at most a minute (EBUSY). Other errors mean that
+    /// the item does not exist, or that its file system has no locks.
     virtual Result<std::unique_ptr<ItemLock>> lockItem(const URL& item,
                                                        const std::function<void()>& waiting) = 0;
 
-    /// Holds the item: until the result dies, this manager finds it, and for a directory all below it, from
-    /// the descriptor that is opened now (foundation::Places).
+    /// Holds the item: until the result is destroyed, this manager resolves it, and all paths below a
+    /// directory, from the descriptor opened now (foundation::Places).
     virtual Result<foundation::Anchor> holdItem(const URL& item) = 0;
 
     /// Main executable of the directory, opened as a bundle.
     virtual std::optional<URL> mainExecutableOfBundle(const URL& directory) = 0;
 
-    /// Whether the file system can clone that very file (reflink), found by asking it without making a file
-    /// (but for a file without a name where the item is another user's and may only be read). An error is a
-    /// question that could not be put.
+    /// Whether the file system can clone that file (reflink). The probe creates no file, except an
+    /// unnamed one if the item is another user's and is only readable. Returns an error if the probe
+    /// itself fails.
     virtual Result<bool> volumeSupportsCloning(const URL& item) = 0;
 
     /// A fresh directory of mode 0700 beside `item`, named `.pinwell-replacement-` and six random characters.
     virtual Result<URL> createReplacementDirectory(const URL& item) = 0;
 
-    /// A copy at `destination`, which must not exist (EEXIST): a clone where that can be; carries mode, owner
-    /// where permitted, extended attributes, access control list and times, as far as the volume can keep
-    /// them. A failed copy leaves nothing there. Regular files only (EINVAL, EISDIR, ELOOP). Not flushed to
-    /// stable storage.
+    /// A copy at `destination`, which must not exist (EEXIST): a clone if possible. Copies mode, owner if
+    /// permitted, extended attributes, access control list and times, as far as the volume can store them. A
+    /// failed copy leaves nothing there. Regular files only (EINVAL, EISDIR, ELOOP). Not flushed to stable
+    /// storage.
     virtual Result<void> copyItem(const URL& source, const URL& destination) = 0;
 
-    /// A new file at `destination`, which must not exist, with the source's bytes and nothing else of it:
-    /// mode and owner are those of any file newly made there. On stable storage, its name too, when this
-    /// returns. A failed copy leaves nothing there. Regular files only.
+    /// A new file at `destination`, which must not exist, with only the source's bytes: mode and owner are
+    /// those of any new file there. The file and its name are on stable storage when this returns. A failed
+    /// copy leaves nothing there. Regular files only.
     virtual Result<void> copyContents(const URL& source, const URL& destination) = 0;
 
-    /// Removes a file, a link, or a directory with all that is in it; follows no link. What an error names is
-    /// still there, and so may be more.
+    /// Removes a file, a link, or a directory with its contents; follows no link. After an error, the item
+    /// that it names still exists, and maybe others.
     virtual Result<void> removeItem(const URL& item) = 0;
 
-    /// Puts `replacement` in the place of `original` with one rename, durable before it returns, after
-    /// carrying over the original's mode, owner, extended attributes and access control list (not its times:
-    /// the contents are new). Both are regular files, and not the same one. Afterwards the replacement's old
-    /// path holds nothing, and the directory it stood in is gone when it is one of
-    /// createReplacementDirectory's and holds nothing else. An error leaves both files where they were,
-    /// except when it is the directory's flush after the swap that fails.
+    /// Replaces `original` by `replacement` with one rename, durable before it returns. First copies
+    /// the original's mode, owner, extended attributes and access control list (not its times: the
+    /// contents are new). Both are regular files, and not the same one. Afterwards the replacement's
+    /// old path is empty. Its directory is removed if it is from createReplacementDirectory and is
+    /// empty. An error leaves both files in place, except if the directory's flush after the swap
+    /// fails.
     virtual Result<void> replaceItem(const URL& original, const URL& replacement) = 0;
 
-    /// Moves the item (a link itself) to the user's freedesktop.org trash, the volume's own where it is not
-    /// the home directory's; answers where it is now. An error leaves it where it was, except when it is
-    /// where it went that cannot be told; what is beneath is the user information's underlying error.
+    /// Moves the item (a link itself) to the user's freedesktop.org trash, or to the volume's own if it is
+    /// not on the home directory's volume. Returns its new place. An error leaves it in place, unless only
+    /// the new place is unknown; the user information has the underlying error.
     virtual Result<URL> trashItem(const URL& item) = 0;
 
     /// The whole of a regular file of at most kMaximumWholeFile bytes (EFBIG). Follows no link in the last
-    /// component (ELOOP), never blocks on what is not a regular file (EINVAL, EISDIR).
+    /// component (ELOOP), never blocks on anything but a regular file (EINVAL, EISDIR).
     virtual Result<Data> contentsOfFile(const URL& file) = 0;
 
-    /// Writes a file of mode 0600 and flushes its contents to stable storage. Atomically: to a file beside it
-    /// that is then renamed into place, replacing whatever non-directory is there; a failure leaves nothing
-    /// behind. Otherwise plainly: a new file, which a failure removes, and whose name is on stable storage
-    /// too; or an existing regular file overwritten, which a failure leaves half written.
+    /// Writes a file of mode 0600 and flushes its contents to stable storage. `atomic` writes a file beside
+    /// it and renames it into place, over anything except a directory; a failure leaves nothing behind.
+    /// `plain` makes a new file, with its name on stable storage too, and removes it on failure; or
+    /// overwrites an existing regular file, which a failure leaves half written.
     enum class Writing { plain, atomic };
     virtual Result<void> writeFile(ByteView contents, const URL& file, Writing writing) = 0;
 
@@ -182,12 +182,12 @@ class FileManager {
     virtual Result<std::unique_ptr<FileHandle>> openForReading(const URL& file) = 0;
     virtual Result<std::unique_ptr<FileHandle>> openForUpdating(const URL& file) = 0;
 
-    /// $TMPDIR when it is an absolute path, else /tmp.
+    /// $TMPDIR if it is an absolute path, otherwise /tmp.
     virtual URL temporaryDirectory() = 0;
 };
 
-/// The file manager of this machine. `typeNaming` must be callable, from any thread. Files are found through
-/// `places`, which other services may share.
+/// The file manager of this machine. `typeNaming` must be callable from any thread. Paths are resolved
+/// through `places`, which other services may share.
 std::unique_ptr<FileManager> makeLocalFileManager(
     TypeNaming typeNaming,
     std::shared_ptr<foundation::Places> places = std::make_shared<foundation::Places>());

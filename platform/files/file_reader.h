@@ -1,4 +1,4 @@
-// Reading an open regular file, piece by piece: the half of a file handle that parsers need.
+// Reads an open regular file, piece by piece: the half of a file handle that parsers need.
 //
 // All calls block; one reader serves one thread at a time.
 #pragma once
@@ -14,8 +14,8 @@
 
 namespace pinwell::files {
 
-/// A reader's or a file handle's failure. `what()` is the reason text: what was tried, on which file, and the
-/// system's word for why not.
+/// A reader's or a file handle's failure. `what()` is the reason text: the operation, the file, and the
+/// system's reason.
 class FileHandleError : public std::runtime_error {
   public:
     using std::runtime_error::runtime_error;
@@ -26,34 +26,34 @@ class FileReader {
   public:
     virtual ~FileReader() = default;
 
-    /// Both answer the new position, in bytes from the start. A position past the end is one.
+    /// Both return the new position, in bytes from the start. A position past the end is allowed.
     virtual std::uint64_t seekToEnd() = 0;
     virtual std::uint64_t seek(std::uint64_t position) = 0;
     virtual std::uint64_t position() = 0;
 
-    /// Up to `length` bytes; fewer only at the end of the file. Memory grows with what is really read.
+    /// Up to `length` bytes; fewer only at the end of the file. Memory grows with the bytes really read.
     virtual foundation::Data read(std::uint64_t length) = 0;
 
-    /// The first position from `position` on that may have something other than zeros: in a sparse file the
-    /// end of a hole. The position for reading stays where it is.
+    /// The first position from `position` on that may have non-zero bytes: in a sparse file the end of a
+    /// hole. The read position does not change.
     virtual std::uint64_t nextData(std::uint64_t position) { return position; }
 };
 
 /// Up to `length` bytes from the position on; fewer only at the end of the file. For lengths that a file
-/// claims: memory is taken for what is there, not for holes and zeros. Throws FileHandleError.
+/// claims: memory is taken only for non-zero bytes, not for holes. Throws FileHandleError.
 foundation::SharedBytes readShared(FileReader& file, std::uint64_t length);
 
 /// A buffer of that length. Throws FileHandleError if there is no address space for it.
 foundation::SparseBuffer makeBuffer(std::uint64_t length);
 
 /// The regular file at `path`, opened close-on-exec. Follows no link in the last component and never blocks
-/// on what is no regular file (EINVAL, EISDIR, ELOOP).
+/// on anything but a regular file (EINVAL, EISDIR, ELOOP).
 foundation::Result<std::unique_ptr<FileReader>> openReader(const std::string& path);
 
 /// A reader of a descriptor that stays the caller's: it must be open for reading as long as the reader lives,
-/// and its own position is neither used nor moved. Anything but a regular file is refused as above, and
-/// what cannot be read from with EBADF. Errors
-/// speak of the file as `name`.
+/// and its own position is neither used nor moved. Anything but a regular file is
+/// refused as above, and an unreadable descriptor with EBADF. Errors call the file
+/// `name`.
 foundation::Result<std::unique_ptr<FileReader>> readerOf(int descriptor, std::string name);
 
 }  // namespace pinwell::files

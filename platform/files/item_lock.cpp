@@ -14,7 +14,7 @@ namespace {
 
 using Clock = std::chrono::steady_clock;
 
-// flock(2) has no time limit of its own, and an alarm that could end it would be the whole process's.
+// flock(2) has no time limit, and an alarm to interrupt it would affect the whole process.
 constexpr std::chrono::milliseconds kRetryInterval{10};
 
 class DescriptorLock final : public ItemLock {
@@ -59,7 +59,7 @@ Result<void> lockBefore(Clock::time_point deadline, int descriptor, const std::s
 }  // namespace
 
 bool hasMandatoryLocks(std::int64_t fileSystemType) {
-    // Of linux/magic.h, in 32 bits: some processors have the field signed.
+    // From linux/magic.h, in 32 bits: the field is signed on some processors.
     constexpr std::array<std::uint32_t, 3> kTypes{0x517B, 0xFF534D42, 0xFE534D42};  // SMB, CIFS, SMB2
     return std::find(kTypes.begin(), kTypes.end(), static_cast<std::uint32_t>(fileSystemType)) !=
            kTypes.end();
@@ -79,7 +79,7 @@ Result<std::unique_ptr<ItemLock>> lockPath(const Places& places, const std::stri
         if (auto done = lockBefore(deadline, descriptor->get(), path, waiting, hasWaited); !done)
             return done.error();
 
-        // Who held the lock may have put another file in this one's place, which is then not locked at all.
+        // The previous holder may have replaced this file by another one, which is then not locked at all.
         struct stat locked {};
         if (fstat(descriptor->get(), &locked) != 0) return lastError(path);
         const auto named = statusOfItem(*place);

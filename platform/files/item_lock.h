@@ -11,17 +11,17 @@
 
 namespace pinwell::files {
 
-/// How long lockItem waits for another process: longer than any write takes, shorter than a build is left
-/// hanging for.
+/// How long lockItem waits for another process: longer than any write takes, and short enough for a build to
+/// wait.
 inline constexpr std::chrono::seconds kLockPatience{60};
 
-/// As FileManager::lockItem, with a patience of the caller's. The path is looked up in `places`.
+/// Like FileManager::lockItem, with the caller's own time limit. The path is resolved through `places`.
 Result<std::unique_ptr<ItemLock>> lockPath(const Places& places, const std::string& path,
                                            std::chrono::milliseconds patience,
                                            const std::function<void()>& waiting);
 
-/// Whether locks on a file system of that type (statfs(2)) keep others from reading and writing: on CIFS and
-/// SMB, flock(2) becomes a lock that the server enforces.
+/// Whether locks on a file system of that type (statfs(2)) block other readers and writers: on CIFS and SMB,
+/// flock(2) becomes a lock that the server enforces.
 bool hasMandatoryLocks(std::int64_t fileSystemType);
 
 }  // namespace pinwell::files

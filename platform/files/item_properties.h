@@ -1,4 +1,4 @@
-// Questions about an item itself, none of which opens it. For this folder only.
+// Properties of an item itself, read without opening it. For this folder only.
 #pragma once
 
 #include "files/posix.h"

@@ -21,7 +21,8 @@
 namespace pinwell::files {
 namespace {
 
-// The path of a URL that can name a file: the system would stop at a zero byte, and take another file.
+// The path of a URL that can name a file. A zero byte is refused: the system would stop there, and use
+// another file.
 Result<std::string> pathOf(const URL& url) {
     if (!url.isFileURL() || url.path().find('\0') != std::string::npos)
         return Error::posix(EINVAL, url.path());
@@ -65,7 +66,7 @@ class LocalFileManager final : public FileManager {
     Result<URL> createReplacementDirectory(const URL& item) override {
         const auto made = at(item, makeReplacementDirectory);
         if (!made) return made.error();
-        // What is put there is found where it was put, whoever moves the directory's parents meanwhile.
+        // Files in it are found again even if somebody moves the directory's parents meanwhile.
         if (auto held = places_->hold(*made)) {
             const std::lock_guard lock(mutex_);
             replacementDirectories_.push_back(*std::move(held));
@@ -120,7 +121,7 @@ class LocalFileManager final : public FileManager {
     URL temporaryDirectory() override { return foundation::temporaryDirectory(); }
 
   private:
-    // What `operation` makes of the place that the URL names, or why there is none.
+    // The result of `operation` for the URL's place, or the error if there is none.
     template <class Operation>
     auto at(const URL& url, Operation operation) -> decltype(operation(std::declval<const Place&>())) {
         const auto path = pathOf(url);
@@ -137,7 +138,7 @@ class LocalFileManager final : public FileManager {
         });
     }
 
-    // A replacement directory that is to go is found as an entry of the one that it stands in.
+    // To remove a replacement directory, it is resolved as an entry of its parent.
     void letGo(const URL& directory) {
         const std::lock_guard lock(mutex_);
         std::erase_if(replacementDirectories_,

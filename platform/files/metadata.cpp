@@ -14,10 +14,10 @@ namespace {
 // XATTR_LIST_MAX and XATTR_SIZE_MAX of the kernel (linux/limits.h): no list and no value is longer.
 constexpr std::size_t kMaximumAttributeBytes = 65536;
 
-// The access control list, in the kernel's own form: acl(5) is kept as this attribute.
+// The access control list, in the kernel's own form: acl(5) is stored as this attribute.
 constexpr std::string_view kAccessControlList = "system.posix_acl_access";
 
-// Attributes that vouch for one file's contents on one inode, and are wrong on any other.
+// Attributes that vouch for one file's contents on one inode, and are wrong on any other file.
 constexpr std::array<std::string_view, 2> kBoundToTheFile{"security.ima", "security.evm"};
 
 using AttributeNames = std::vector<std::string>;
@@ -41,7 +41,7 @@ Result<AttributeNames> attributeNames(const OpenFile& file) {
     return names;
 }
 
-// Whether the name is one that any owner of a file may set, so that a refusal is a failure.
+// Whether every owner of a file may set this attribute. If so, a refusal is a real failure.
 bool isOwners(std::string_view name) {
     return name.starts_with("user.") || name == kAccessControlList;
 }
@@ -55,7 +55,7 @@ Result<void> carryAttribute(const OpenFile& from, const OpenFile& to, const std:
     const ssize_t length =
         uninterrupted([&] { return fgetxattr(from.number(), name.c_str(), value.data(), value.size()); });
     if (length < 0) {
-        // Gone since the list was made, or not ours to read.
+        // Removed after the list was made, or not readable for us.
         if (errno == ENODATA || !isOwners(name)) return {};
         return lastError(from.path());
     }
@@ -85,11 +85,11 @@ Result<void> carryAttributes(const OpenFile& from, const OpenFile& to, const Att
             continue;
         if (auto done = carryAttribute(from, to, name, value); !done) return done;
     }
-    // A directory's default access control list, say, has already given the new file one of its own.
+    // For example, a directory's default access control list has already given the new file a list.
     return dropForeignAttributes(to, names);
 }
 
-// Owner and group, or the group alone, or neither: only the superuser may give files away.
+// Owner and group, or the group alone, or neither: only the superuser may change a file's owner.
 Result<void> carryOwner(const struct stat& wanted, const OpenFile& to) {
     constexpr auto kUnchanged = static_cast<uid_t>(-1);
     for (const uid_t owner : {wanted.st_uid, kUnchanged}) {
@@ -100,7 +100,7 @@ Result<void> carryOwner(const struct stat& wanted, const OpenFile& to) {
     return {};
 }
 
-// The mode for a file of which owner, group and access control list may not all have been carried.
+// The mode for a file whose owner, group and access control list may not all have been copied.
 Result<mode_t> permittedMode(const struct stat& wanted, const OpenFile& to, bool wantsAccessControlList) {
     struct stat got {};
     if (fstat(to.number(), &got) != 0) return lastError(to.path());
@@ -108,7 +108,8 @@ Result<mode_t> permittedMode(const struct stat& wanted, const OpenFile& to, bool
     if (got.st_uid != wanted.st_uid) mode &= ~static_cast<mode_t>(S_ISUID);
     if (got.st_gid != wanted.st_gid) mode &= ~static_cast<mode_t>(S_ISGID);
     if (wantsAccessControlList) {
-        // With a list, the group bits are its mask; without one they would open the file to the owning group.
+        // With a list, the group bits are its mask; without it they would give the rights to the owning
+        // group.
         const auto names = attributeNames(to);
         if (!names) return names.error();
         if (!contains(*names, kAccessControlList)) mode &= ~static_cast<mode_t>(S_IRWXG);
@@ -124,8 +125,8 @@ Result<void> carryMetadata(const OpenFile& from, const OpenFile& to) {
     const auto names = attributeNames(from);
     if (!names) return names.error();
 
-    // In this order: nobody else gets in before all is in place, the owner can still write attributes
-    // although the final mode may be read-only, and changing the owner clears file capabilities and set-ID
+    // The order matters. Nobody else gets access before all is set. The owner can still write attributes,
+    // although the final mode may be read-only. Changing the owner clears file capabilities and set-ID
     // bits.
     if (uninterrupted([&] { return fchmod(to.number(), S_IRUSR | S_IWUSR); }) != 0)
         return lastError(to.path());

@@ -12,8 +12,8 @@
 namespace pinwell::files {
 namespace {
 
-// Without O_NONBLOCK, a FIFO that takes the file's place between the look and the open would block us for
-// good.
+// Without O_NONBLOCK, a FIFO that replaces the file between the check and the open would block us
+// forever.
 constexpr int kSafeFlags = O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY;
 
 Result<OpenFile> regularFile(FileDescriptor descriptor, Place place) {
@@ -47,7 +47,7 @@ int notRegularReason(mode_t mode) {
 }
 
 Result<OpenFile> openRegularFile(const Place& place, int access) {
-    // Opening alone can set a device to work, so the look comes first.
+    // Opening alone can start a device, so the check comes first.
     const auto before = statusOfItem(place);
     if (!before) return before.error();
     if (const int reason = notRegularReason(before->st_mode); reason != 0)
@@ -91,7 +91,7 @@ std::string freshName(std::string_view prefix) {
     if (getentropy(random.data(), random.size()) != 0)
         throw std::system_error(errno, std::generic_category(), "getentropy");
     std::string name(prefix);
-    // Not evenly spread, and no need to be: the name must be hard to guess, not secret.
+    // The distribution is not uniform and need not be: the name must be hard to guess, not secret.
     for (const unsigned char byte : random) name += kLetters[byte % kLetters.size()];
     return name;
 }
@@ -138,18 +138,18 @@ Result<void> flushDirectoryOf(const Place& place) {
     const Place parent{place.parent, ".", directoryOf(place.path)};
     const auto directory = openDirectory(parent);
     if (!directory) {
-        // One may write to a directory that one may not read.
+        // A directory may be writable but not readable.
         if (directory.error().code() == EACCES) return {};
         return directory.error();
     }
     auto done = flush(directory->get(), parent.path);
-    // EINVAL: a file system (of shared folders, say) that cannot flush directories, fsync(2).
+    // EINVAL: a file system that cannot flush directories, for example of shared folders; see fsync(2).
     if (!done && done.error().code() == EINVAL) return {};
     return done;
 }
 
 Result<void> closeReporting(OpenFile& file) {
-    // Never again after EINTR: on Linux the number is free by then, and may be another thread's new file.
+    // Never repeated after EINTR: on Linux the number is free then, and may be another thread's new file.
     if (::close(file.descriptor.release()) != 0 && errno != EINTR) return lastError(file.path());
     return {};
 }

@@ -1,5 +1,5 @@
-// The system's file calls as this folder uses them: interrupted calls repeated, short ones finished, and no
-// errno lost on the way. For this folder only.
+// Wrappers of the system's file calls: they repeat interrupted calls, finish short ones, and never lose an
+// errno. For this folder only.
 #pragma once
 
 #include <sys/stat.h>
@@ -23,11 +23,11 @@ using foundation::FileDescriptor;
 using foundation::Place;
 using foundation::Places;
 
-/// Largest piece that is read or written with one call, and so the most that memory grows by at a time.
+/// Maximum number of bytes in one read or write, and so the maximum growth of memory at a time.
 inline constexpr std::size_t kPieceSize = std::size_t{256} * 1024;
 inline constexpr std::size_t kFirstPieceSize = std::size_t{4} * 1024;
 
-/// The answer of `call`, made again for as long as a signal interrupts it.
+/// The result of `call`, repeated while a signal interrupts it.
 template <class Call>
 auto uninterrupted(Call call) {
     for (;;) {
@@ -36,12 +36,12 @@ auto uninterrupted(Call call) {
     }
 }
 
-/// The failure of the call made just before.
+/// The error of the last call.
 inline Error lastError(const std::string& path) {
     return Error::posix(errno, path);
 }
 
-/// An open regular file, with its place, which its errors name, and its status when it was opened.
+/// An open regular file, its place, which errors name, and its status at opening.
 struct OpenFile {
     FileDescriptor descriptor;
     Place place;
@@ -51,34 +51,34 @@ struct OpenFile {
     const std::string& path() const noexcept { return place.path; }
 };
 
-/// The directory that a path's last component stands in.
+/// The directory of a path's last component.
 std::string directoryOf(const std::string& path);
 
-/// Status of the item itself, a link not followed.
+/// Status of the item itself, without following a link.
 Result<struct stat> statusOfItem(const Place& place);
 
-/// Why an item of this type is not the regular file that was asked for; 0 when it is.
+/// The errno for an item of this type instead of a regular file; 0 for a regular file.
 int notRegularReason(mode_t mode);
 
-/// Opens what is a regular file before and after opening; never follows a link in the last component, never
-/// blocks, and never opens a device. `access` is O_RDONLY, O_WRONLY or O_RDWR.
+/// Opens an item that is a regular file before and after opening. Never follows a link in the last component,
+/// never blocks, and never opens a device. `access` is O_RDONLY, O_WRONLY or O_RDWR.
 Result<OpenFile> openRegularFile(const Place& place, int access);
 
-/// Modes of a new file: its owner's alone, or what the umask leaves of everybody's.
+/// Modes of a new file: for the owner alone, or for everybody as the umask allows.
 inline constexpr mode_t kPrivateFile = S_IRUSR | S_IWUSR;
 inline constexpr mode_t kOrdinaryFile = S_IRUSR | S_IWUSR | S_IRGRP | S_IWGRP | S_IROTH | S_IWOTH;
 
-/// Makes and opens a file for writing; there must be nothing at `place` yet.
+/// Creates and opens a file for writing; `place` must not exist yet.
 Result<OpenFile> createFile(const Place& place, mode_t mode = kPrivateFile);
 
-/// Makes and opens a hidden file of mode 0600 and of a name that was free, beside the item at `place`.
+/// Creates and opens a hidden file of mode 0600 with a free name, beside the item at `place`.
 Result<OpenFile> createTemporaryFileBeside(const Place& place);
 
-/// A name that nobody guesses: `prefix` and kRandomLetters letters and digits.
+/// An unguessable name: `prefix` and kRandomLetters letters and digits.
 inline constexpr std::size_t kRandomLetters = 6;
 std::string freshName(std::string_view prefix);
 
-/// Gives `make` fresh names until one is free: it returns -1, with EEXIST in errno, for one that is not.
+/// Calls `make` with fresh names until one is free: it returns -1, with EEXIST in errno, for a used name.
 template <class Make>
 int underFreshName(std::string_view prefix, std::string& name, Make make) {
     constexpr int kMaximumTries = 100;  // the 62^6 names of one prefix are never that full
@@ -91,7 +91,7 @@ int underFreshName(std::string_view prefix, std::string& name, Make make) {
     return answer;
 }
 
-/// Opens the directory itself, a link not followed.
+/// Opens the directory itself, without following a link.
 Result<FileDescriptor> openDirectory(const Place& place);
 
 /// One rename; errors name the new place.
@@ -99,14 +99,14 @@ Result<void> renameItem(const Place& from, const Place& to);
 
 Result<void> writeAll(const OpenFile& file, ByteView bytes);
 
-/// Reads by `readPiece`(buffer, size), which answers as read(2) does, until `length` bytes are had or the
-/// file ends; nothing when a piece fails.
+/// Reads with `readPiece`(buffer, size), which returns the same as read(2), until `length` bytes are read or
+/// the file ends; `nullopt` if a piece fails.
 template <class ReadPiece>
 std::optional<Data> readPieces(std::uint64_t length, ReadPiece readPiece) {
     Data data;
     while (data.size() < length) {
         const std::size_t had = data.size();
-        // Little at first: most files are small, and fresh memory costs more than another call.
+        // Starts small: most files are small, and new memory costs more than another call.
         const std::size_t piece = std::clamp(had, kFirstPieceSize, kPieceSize);
         data.resize(had + static_cast<std::size_t>(std::min<std::uint64_t>(length - had, piece)));
         const ssize_t count = uninterrupted([&] { return readPiece(data.data() + had, data.size() - had); });
@@ -117,20 +117,20 @@ std::optional<Data> readPieces(std::uint64_t length, ReadPiece readPiece) {
     return data;
 }
 
-/// Reads from the current position until `length` bytes are had or the file ends.
+/// Reads from the current position until `length` bytes are read or the file ends.
 Result<Data> readUpTo(const OpenFile& file, std::uint64_t length);
 
-/// Returns when what `descriptor` stands for is on stable storage.
+/// Returns when the file or directory of `descriptor` is on stable storage.
 Result<void> flush(int descriptor, const std::string& path);
 
-/// The same for the directory that an item stands in, and so for the name of what was made there; no failure
-/// where the file system has no such thing, or the directory may not be read.
+/// The same for an item's directory, and so for the name of a new item; succeeds if the file system does not
+/// support it, or the directory is not readable.
 Result<void> flushDirectoryOf(const Place& place);
 
-/// Closes and reports what the file system has kept back until now.
+/// Closes, and reports errors that the file system has delayed.
 Result<void> closeReporting(OpenFile& file);
 
-/// Unlinks a file that was begun and not kept, so that no failure leaves half of one behind.
+/// Unlinks an unfinished file, so that a failure leaves no partial file behind.
 class HalfMadeFile {
   public:
     explicit HalfMadeFile(Place place) : place_(std::move(place)) {}

@@ -10,7 +10,7 @@ namespace {
 using foundation::SharedBytes;
 using foundation::SparseBuffer;
 
-/// Read at once: holds a signature, or a ticket, of any usual size.
+/// Read at once: large enough for usual signatures and tickets.
 constexpr std::uint64_t kPiece = 1024 * 1024;
 
 }  // namespace

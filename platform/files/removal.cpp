@@ -21,7 +21,7 @@ struct DirectoryCloser {
 };
 using DirectoryStream = std::unique_ptr<DIR, DirectoryCloser>;
 
-// One directory on the way down; the way back up must lead to the very same one.
+// One directory on the way down; the way back up must lead to the same one.
 struct Step {
     std::string name;
     dev_t device;
@@ -44,7 +44,7 @@ class TreeRemoval {
     TreeRemoval(FileDescriptor parent, std::string parentPath)
         : current_(std::move(parent)), rootPath_(std::move(parentPath)) {}
 
-    // Removes `name`, which is known to be a directory that is not empty, with all that is in it.
+    // Removes `name`, which is a directory that is not empty, with its contents.
     Result<void> run(std::string name) {
         if (auto done = descend(std::move(name)); !done) return done;
         while (!way_.empty()) {
@@ -72,15 +72,15 @@ class TreeRemoval {
         return {};
     }
 
-    // Removes what can be removed at once. Answers the first directory found that is not empty; empty when
-    // all is gone.
+    // Removes the entries that can be removed at once. Returns the first directory that is not empty; an
+    // empty text if all entries are removed.
     Result<std::string> emptyCurrent() {
-        // Opened anew: the position of an open directory is shared by its duplicates.
+        // Opened again: duplicates of an open directory share its position.
         FileDescriptor listed(uninterrupted([&] { return openat(current_.get(), ".", kDirectoryFlags); }));
         if (!listed) return lastError(pathOf("."));
         const DirectoryStream stream(fdopendir(listed.get()));
         if (!stream) return lastError(pathOf("."));
-        static_cast<void>(listed.release());  // the stream's now
+        static_cast<void>(listed.release());  // the stream owns it now
 
         for (;;) {
             errno = 0;
@@ -108,7 +108,7 @@ class TreeRemoval {
         FileDescriptor above(uninterrupted([&] { return openat(current_.get(), "..", kDirectoryFlags); }));
         struct stat status {};
         if (!above || fstat(above.get(), &status) != 0) return lastError(path);
-        // Somebody has moved the directory elsewhere: what is there is not ours to remove.
+        // Somebody has moved the directory: the items there are not ours to remove.
         if (status.st_dev != step.device || status.st_ino != step.inode) return Error::posix(EBUSY, path);
         current_ = std::move(above);
         if (unlinkat(current_.get(), step.name.c_str(), AT_REMOVEDIR) != 0) return lastError(path);

@@ -5,7 +5,7 @@
 
 namespace pinwell::files {
 
-/// As FileManager::removeItem. Never leaves the tree, whatever is moved about in it meanwhile, and takes no
+/// Like FileManager::removeItem. Never leaves the tree, even if others move items in it meanwhile. Needs no
 /// more open files or stack for a deep tree than for a flat one.
 Result<void> removeTree(const Place& place);
 

@@ -16,7 +16,7 @@ bool isReplacementDirectory(std::string_view name) {
     return name.starts_with(kNamePrefix) && name.size() == kNamePrefix.size() + kRandomLetters;
 }
 
-// The mode is 0700 less the umask, and a set-group-ID parent hands that bit down.
+// The mode is 0700 without the umask's bits, and a set-group-ID parent passes on that bit.
 Result<void> makePrivate(const Place& place) {
     const auto directory = openDirectory(place);
     if (!directory) return directory.error();
@@ -46,10 +46,10 @@ Result<void> replaceFile(const Place& original, const Place& replacement, const 
     if (!from) return from.error();
     const auto to = openRegularFile(replacement, O_RDONLY);
     if (!to) return to.error();
-    // rename(2) does nothing at all between two names of one file.
+    // rename(2) between two names of one file does nothing.
     if (from->status.st_dev == to->status.st_dev && from->status.st_ino == to->status.st_ino)
         return Error::posix(EINVAL, replacement.path);
-    // Opened beforehand, so that what cannot be flushed is not changed either.
+    // Opened before the rename, so that a directory that cannot be flushed is not changed.
     const Place parent{original.parent, ".", directoryOf(original.path)};
     const auto directory = openDirectory(parent);
     if (!directory) return directory.error();
@@ -58,7 +58,7 @@ Result<void> replaceFile(const Place& original, const Place& replacement, const 
     if (auto done = flush(to->number(), replacement.path); !done) return done;
     if (auto done = renameItem(replacement, original); !done) return done;
 
-    // Whatever keeps the directory (something else in it, say), the replacement has been made.
+    // Even if the directory cannot be removed (another file in it, for example), the replacement succeeded.
     if (isReplacementDirectory(emptied.name))
         unlinkat(emptied.directory(), emptied.name.c_str(), AT_REMOVEDIR);
     return flush(directory->get(), parent.path);

@@ -1,4 +1,4 @@
-// Putting a finished file in another's place. For this folder only.
+// Replaces a file by a finished one. For this folder only.
 #pragma once
 
 #include <string>
@@ -7,10 +7,10 @@
 
 namespace pinwell::files {
 
-/// As FileManager::createReplacementDirectory: `.pinwell-replacement-XXXXXX` beside `item`.
+/// Like FileManager::createReplacementDirectory: `.pinwell-replacement-XXXXXX` beside `item`.
 Result<std::string> makeReplacementDirectory(const Place& item);
 
-/// As FileManager::replaceItem. `emptied` is the place of the directory that the replacement stands in.
+/// Like FileManager::replaceItem. `emptied` is the place of the replacement's directory.
 Result<void> replaceFile(const Place& original, const Place& replacement, const Place& emptied);
 
 }  // namespace pinwell::files

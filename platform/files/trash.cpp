@@ -13,7 +13,7 @@
 namespace pinwell::files {
 namespace {
 
-// The library's functions, found when something is first trashed.
+// The library's functions, found on first use.
 struct Gio {
     Gio() {
         foundation::LazyLibrary library("libgio-2.0.so.0");
@@ -75,8 +75,8 @@ int errnoOf(const GError& error) {
     }
 }
 
-// Where the open item is now. The library does not tell where it put it; the kernel does, for any kind of
-// trash.
+// The current path of the open item. The library does not return the new place; the kernel knows it, for any
+// kind of trash.
 Result<std::string> currentPath(int item, const std::string& path) {
     const std::string link = "/proc/self/fd/" + std::to_string(item);
     std::string target(PATH_MAX, '\0');
@@ -94,13 +94,14 @@ Result<std::string> moveToTrash(const Place& place) {
     const FileDescriptor item(uninterrupted(
         [&] { return openat(place.directory(), place.name.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC); }));
     if (!item) return lastError(path);
-    // Asked before as well: what could not be told afterwards is better not moved. And the library takes ".."
-    // off a path by its text, which leads elsewhere behind a link; the kernel's path has none.
+    // Read before the move as well: if the place cannot be found afterwards, it is better not to move. Also,
+    // the library removes ".." from the text of a path, which is wrong after a link; the kernel's path has no
+    // "..".
     const auto before = currentPath(item.get(), path);
     if (!before) return before.error();
 
     if (!gio().isThere) return Error::posix(ENOSYS, path);
-    // The local file system's own objects; the default ones may come from a desktop's modules.
+    // The local file system's objects; the default ones may come from a desktop's modules.
     const FilePointer file(gio().vfsGetFileForPath(gio().vfsGetLocal(), before->c_str()));
     GError* failure = nullptr;
     if (gio().fileTrash(file.get(), nullptr, &failure) == 0) {

@@ -7,7 +7,7 @@
 
 namespace pinwell::files {
 
-/// As FileManager::trashItem: the path that the item has in the trash.
+/// Like FileManager::trashItem: returns the item's path in the trash.
 Result<std::string> moveToTrash(const Place& place);
 
 }  // namespace pinwell::files

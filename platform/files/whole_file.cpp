@@ -28,9 +28,9 @@ Result<void> overwrite(ByteView contents, const Place& place) {
     if (const int reason = notRegularReason(status->st_mode); reason != 0)
         return Error::posix(reason, place.path);
 
-    // O_CREAT although the file is there: the kernel's guard against files that others have laid out for us
-    // in shared directories (fs.protected_regular) looks at creating opens only. No O_TRUNC before the second
-    // look.
+    // O_CREAT although the file exists: the kernel's protection against files that others have placed in
+    // shared directories (fs.protected_regular) applies only to creating opens. No O_TRUNC before the second
+    // check.
     constexpr int kFlags = O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY;
     FileDescriptor descriptor(
         uninterrupted([&] { return openat(place.directory(), place.name.c_str(), kFlags, kPrivateFile); }));
@@ -63,7 +63,7 @@ Result<void> writeFileAtomically(ByteView contents, const Place& place) {
     auto file = createTemporaryFileBeside(place);
     if (!file) return file.error();
 
-    const Place temporary = std::exchange(file->place, place);  // an error names what the caller knows
+    const Place temporary = std::exchange(file->place, place);  // errors use the caller's name
     HalfMadeFile halfMade(temporary);
     if (auto done = fill(*file, contents); !done) return done;
     if (auto done = closeReporting(*file); !done) return done;

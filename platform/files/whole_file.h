@@ -5,10 +5,10 @@
 
 namespace pinwell::files {
 
-/// As FileManager::contentsOfFile.
+/// Like FileManager::contentsOfFile.
 Result<Data> readWholeFile(const Place& place);
 
-/// As FileManager::writeFile. Atomically, the new file is on stable storage before it gets its name.
+/// Like FileManager::writeFile. With `atomic`, the new file is on stable storage before it gets its name.
 Result<void> writeFileAtomically(ByteView contents, const Place& place);
 Result<void> writeFilePlainly(ByteView contents, const Place& place);
 
