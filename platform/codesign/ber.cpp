@@ -16,7 +16,7 @@ using foundation::ByteReader;
 constexpr std::uint8_t kEndOfContents = 0x00;
 constexpr std::uint8_t kLongTagNumber = 0x1F;
 constexpr std::uint8_t kMoreDigits = 0x80;
-constexpr std::uint8_t kLongLength = 0x80;  // with nothing in the lower bits: indefinite
+constexpr std::uint8_t kLongLength = 0x80;  // with zero lower bits: indefinite
 constexpr std::uint8_t kReservedLength = 0xFF;
 constexpr std::size_t kEndOfContentsSize = 2;
 
@@ -48,7 +48,7 @@ struct Header {
     bool isEndOfContents() const { return tag == kEndOfContents; }
 };
 
-/// The tag; of a number above 30 the digits are passed over.
+/// The tag; the digits of a number above 30 are skipped.
 std::uint8_t readTag(ByteReader& reader) {
     const std::uint8_t tag = reader.u8("tag");
     if ((tag & kLongTagNumber) == kLongTagNumber)
@@ -64,7 +64,7 @@ std::optional<std::uint64_t> readLength(ByteReader& reader, const char* what) {
     if (first == kReservedLength) malformed(what);
     std::uint64_t length = 0;
     for (unsigned digits = first & ~static_cast<unsigned>(kLongLength); digits > 0; --digits) {
-        // Longer than anything that is there, and about to lose its upper digits.
+        // Longer than any input; more digits would overflow.
         if (length >> 32U != 0) malformed(what);
         length = length << 8U | reader.u8("length");
     }
@@ -90,8 +90,8 @@ Header readHeader(ByteView bytes, Work& work, const char* what) {
     }
 }
 
-/// How many bytes of `bytes` are before the end of the contents that begin with them. Definite elements are
-/// stepped over whole.
+/// The length of the contents of indefinite length at the start of `bytes`. Definite elements are skipped
+/// whole.
 std::size_t indefiniteLength(ByteView bytes, Work& work, const char* what) {
     std::size_t position = 0;
     for (unsigned depth = 1;;) {

@@ -17,9 +17,9 @@ Status statusOfLookup(std::int64_t reason) {
     switch (reason) {
         case ENOENT:
         case ENOTDIR:
-        case ELOOP:  // O_NOFOLLOW met a link
+        case ELOOP:  // a link, with O_NOFOLLOW
         case EXDEV:  // a link that leads out of the bundle
-        case ENXIO:  // a socket, or a pipe nobody writes to
+        case ENXIO:  // a socket, or a pipe without a writer
             return kStaticCodeNotFound;
         default:
             return kIOError;
@@ -28,7 +28,7 @@ Status statusOfLookup(std::int64_t reason) {
 
 namespace {
 
-/// Read at once: holds a signature of any usual size.
+/// Read at once: large enough for usual signatures.
 constexpr std::uint64_t kPiece = 1024 * 1024;
 
 foundation::SparseBuffer bufferFor(std::uint64_t length) {
@@ -100,7 +100,7 @@ void FileSource::expectSequentialReads() const {
 std::uint64_t FileSource::nextData(std::uint64_t offset) const {
     const off_t data = lseek(file_.get(), static_cast<off_t>(offset), SEEK_DATA);
     if (data >= 0) return static_cast<std::uint64_t>(data);
-    return errno == ENXIO ? size_ : offset;  // a hole up to the end; or holes are not to be had
+    return errno == ENXIO ? size_ : offset;  // a hole up to the end; or no support for holes
 }
 
 std::size_t FileSource::readAt(std::uint64_t offset, std::span<std::byte> buffer) const {

@@ -1,4 +1,4 @@
-// Random access to the bytes of an artefact, without ever holding all of them.
+// Random access to the bytes of an artefact, without loading all of them.
 #pragma once
 
 #include <cstdint>
@@ -18,37 +18,37 @@ using foundation::ByteView;
 using foundation::Data;
 using foundation::SharedBytes;
 
-/// What the service says of a file that cannot be looked up or opened, by the errno value.
+/// The service's status for a file that cannot be found or opened, by the errno value.
 Status statusOfLookup(std::int64_t reason);
 
-/// Bytes with a size that was fixed when the source was made. A file may change afterwards; a read that no
-/// longer finds its bytes then fails, and nothing else happens.
+/// Bytes with a size fixed at construction. A file may change afterwards; then a read beyond its end fails,
+/// without other effects.
 class ByteSource {
   public:
     virtual ~ByteSource() = default;
 
     virtual std::uint64_t size() const = 0;
 
-    /// Exactly `length` bytes from `offset`. Throws CodeError: kInvalidSignature when the range does not lie
-    /// within size(), kIOError when the bytes cannot be read. Callers hold `length` against a named maximum
-    /// first.
+    /// Exactly `length` bytes from `offset`. Throws CodeError: kInvalidSignature if the range is not
+    /// within size(), kIOError if the bytes cannot be read. Callers first compare `length` with a named
+    /// maximum.
     Data read(std::uint64_t offset, std::size_t length) const;
 
-    /// The same for a length that the file itself claims: memory is taken for what is there, not for holes
-    /// and zeros. Throws CodeError (kIOError) also if there is no address space for it.
+    /// The same for a length that the file itself claims: memory is taken only for non-zero bytes, not for
+    /// holes. Throws CodeError (kIOError) also if there is no address space for it.
     SharedBytes readShared(std::uint64_t offset, std::uint64_t length) const;
 
-    /// The same into a buffer of the caller's, all of which is filled.
+    /// The same into the caller's buffer, which is filled completely.
     void read(std::uint64_t offset, std::span<std::byte> buffer) const;
 
-    /// A hint that all of it is about to be read, from the first byte to the last.
+    /// A hint that the caller will read all bytes, from the first to the last.
     virtual void expectSequentialReads() const {}
 
   protected:
-    /// The first position from `offset` on that may have something other than zeros; the size where none has.
+    /// The first position from `offset` on that may have a non-zero byte; the size if there is none.
     virtual std::uint64_t nextData(std::uint64_t offset) const { return offset; }
 
-    /// Fills as much of `buffer` as there are bytes at `offset` and answers how much that was.
+    /// Fills `buffer` with the bytes at `offset`, as many as there are, and returns their number.
     virtual std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const = 0;
 
   private:
@@ -56,16 +56,16 @@ class ByteSource {
     void readAll(std::uint64_t offset, std::span<std::byte> buffer) const;
 };
 
-/// A regular file, held open: a path that is replaced later does not matter any more.
+/// A regular file, kept open: a later change of its path has no effect.
 class FileSource final : public ByteSource {
   public:
     /// Never follows a link in the last component and never blocks on a pipe or device. Throws CodeError:
-    /// kStaticCodeNotFound when no regular file is there, kIOError when it cannot be opened.
+    /// kStaticCodeNotFound if there is no regular file, kIOError if it cannot be opened.
     FileSource(const foundation::Places& places, const std::string& path);
 
     std::uint64_t size() const override { return size_; }
 
-    /// Has the kernel read further ahead.
+    /// Makes the kernel read further ahead.
     void expectSequentialReads() const override;
 
   private:

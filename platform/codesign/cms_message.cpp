@@ -93,7 +93,7 @@ std::vector<Algorithm> parseDigestAlgorithms(Reader list, Work& work) {
     return algorithms;
 }
 
-// Other forms than X.509, all of them tagged, count and are not looked at: no signer here can have one.
+// Other forms than X.509, which all have a tag, are counted but not parsed: no signer here can have one.
 void parseCertificates(const Element& element, Work& work, SignedMessage& into) {
     for (Reader list(element.contents, work); !list.atEnd();) {
         if (into.certificates.size() + into.otherCertificates == kMaximumCertificates)

@@ -1,4 +1,4 @@
-// A CMS SignedData message (RFC 5652), DER or BER, taken apart without a library.
+// A CMS SignedData message (RFC 5652), DER or BER, parsed without a library.
 //
 //   ContentInfo  = { 1.2.840.113549.1.7.2, [0] SignedData }
 //   SignedData   = { version, SET of digest algorithms, { content type, [0] OCTET STRING, if not detached },
@@ -7,11 +7,11 @@
 //                    [0] signed attributes, signature algorithm, signature, [1] unsigned attributes }
 //   attribute    = { type, SET of values }
 //
-// A library makes an object of every element and sets up a digest for every algorithm, whoever uses them; so
-// the work is bounded here, before any library sees a byte of the message. Refused: what is not of this shape
-// or has bytes after it, other versions than 1, 3, 4 and 5 (of a signer: 1 and 3), more than
-// kMaximumDigestAlgorithms, more or fewer than one signer, more than kMaximumCertificates, and a message that
-// takes more than ber::kMaximumHeaders to read. There is no limit on its length.
+// A library makes an object for every element and a digest for every algorithm, used or not. So the work is
+// bounded here, before any library reads a byte of the message. Refused: another shape, trailing bytes,
+// versions other than 1, 3, 4 and 5 (of a signer: 1 and 3), more than kMaximumDigestAlgorithms, more or fewer
+// than one signer, more than kMaximumCertificates, and a message with more than ber::kMaximumHeaders headers
+// to read. There is no limit on its length.
 #pragma once
 
 #include <cstdint>
@@ -32,7 +32,8 @@ struct Algorithm {
     foundation::ByteView parameters;  // the whole element; empty if there is none
 };
 
-/// What the choice of a signer's certificate and its key need of an X.509 certificate. Nothing is verified.
+/// The fields of an X.509 certificate for choosing the signer's certificate, and its key. Nothing is
+/// verified.
 struct MessageCertificate {
     foundation::ByteView whole;
     foundation::ByteView issuer;                    // the whole Name
@@ -45,7 +46,7 @@ struct MessageSigner {
     int version = 1;
     foundation::ByteView issuer;                    // and serial number; empty if there is a key identifier
     foundation::ByteView serialNumber;              // contents of the INTEGER
-    std::optional<foundation::Data> keyIdentifier;  // in the place of both
+    std::optional<foundation::Data> keyIdentifier;  // instead of both
     Algorithm digestAlgorithm;
     std::optional<ber::Element> signedAttributes;
     Algorithm signatureAlgorithm;
@@ -53,7 +54,7 @@ struct MessageSigner {
     std::optional<ber::Element> unsignedAttributes;
 };
 
-/// A message. Its views are into the bytes that it was parsed from.
+/// A message. Its views refer to the parsed bytes.
 struct SignedMessage {
     int version = 1;
     std::vector<Algorithm> digestAlgorithms;
@@ -69,14 +70,14 @@ struct SignedMessage {
 SignedMessage parseSignedMessage(foundation::ByteView bytes);
 
 /// The value of an attribute by its type, the contents of an OBJECT IDENTIFIER; nullopt unless `attributes`
-/// holds exactly one attribute of the type, with exactly one value. Throws CodeError if any is malformed.
+/// has exactly one attribute of the type, with exactly one value. Throws CodeError if any is malformed.
 std::optional<ber::Element> soleValueOf(const ber::Element& attributes, foundation::ByteView type,
                                         const char* what);
 
 /// An AlgorithmIdentifier, the next element of `reader`. Throws CodeError.
 Algorithm readAlgorithm(ber::Reader& reader, ber::Work& work, const char* what);
 
-/// Whether `attributes` holds an attribute of another type than this one. Throws CodeError if any is
+/// Whether `attributes` has an attribute of another type. Throws CodeError if any is
 /// malformed.
 bool hasAttributeBeside(const ber::Element& attributes, foundation::ByteView type, const char* what);
 

@@ -35,7 +35,8 @@ constexpr std::string_view kTimeStampContent =
 constexpr std::string_view kTimeStampTokenAttribute =
     "\x2A\x86\x48\x86\xF7\x0D\x01\x09\x10\x02\x0E";  // 1.2.840.113549.1.9.16.2.14
 
-/// Longest name that is compared otherwise than byte by byte. Those in certificates take some 100 bytes.
+/// Longest name that is compared by its contents, not byte by byte. Names in certificates take some 100
+/// bytes.
 constexpr std::size_t kMaximumNameSize = 4096;
 
 Name parseName(ByteView bytes) {
@@ -43,7 +44,7 @@ Name parseName(ByteView bytes) {
     return Name(d2i_X509_NAME(nullptr, &cursor, static_cast<long>(bytes.size())));
 }
 
-// A name may be written with other string types in the message than in the certificate.
+// A name may have other string types in the message than in the certificate.
 bool isSameName(ByteView a, ByteView b) {
     if (ber::isEqual(a, b)) return true;
     if (a.size() > kMaximumNameSize || b.size() > kMaximumNameSize) return false;
@@ -73,7 +74,7 @@ const MessageCertificate& certificateOfSigner(const SignedMessage& message) {
     return *found;
 }
 
-// What the signature is over, instead of the content.
+// The bytes that the signature covers instead of the content.
 Data signedBytes(const SignedMessage& message, ByteView content) {
     const MessageSigner& signer = message.signer;
     const ber::Element& attributes = *signer.signedAttributes;
@@ -130,7 +131,7 @@ std::optional<Date> secureTimestamp(ByteView cms) {
     try {
         const SignedMessage message = parseSignedMessage(cms);
         if (!message.signer.unsignedAttributes) return std::nullopt;
-        // With more than one token, none of them could be preferred.
+        // With more than one token, none is used.
         const auto token = soleValueOf(*message.signer.unsignedAttributes, asBytes(kTimeStampTokenAttribute),
                                        kUnsignedAttributes);
         if (!token) return std::nullopt;

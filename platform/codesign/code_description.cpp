@@ -16,7 +16,7 @@ bool isCodeDirectorySlot(std::uint32_t slot) {
     return slot == kSlotCodeDirectory || (slot >= kSlotFirstAlternate && slot <= kSlotLastAlternate);
 }
 
-/// Runs `body`; hands the status and the reason of what it throws to `failed`.
+/// Runs `body`; passes the status and the reason of an exception to `failed`.
 template <class Body, class Failed>
 void guarded(Body body, Failed failed) {
     try {
@@ -45,7 +45,7 @@ CodeDirectoryDescription describeDirectory(std::uint32_t slot, const SharedBytes
     return description;
 }
 
-/// Directories, message, validity; `parsed` gives the components and may throw.
+/// Directories, message, validity; `parsed` returns the components and may throw.
 template <class Parsed>
 void describeComponents(const std::map<std::uint32_t, SharedBytes>& directories, ByteView cms, Parsed parsed,
                         SignatureDescription& into) {
@@ -96,12 +96,12 @@ SignatureDescription describeSuperBlob(const SharedBytes& area, Completion compl
     return description;
 }
 
-/// The superblob without its padding; where its header is wrong, the area as it is.
+/// The superblob without its padding; the whole area if the header is wrong.
 SharedBytes readArea(const ByteSource& source, const FileRange& place) {
     SharedBytes area;
     guarded([&] { area = readSuperBlob(source, place.offset, place.length); }, [](Status, const char*) {});
     if (!area.empty()) return area;
-    // No offset of an index leads further.
+    // An offset in an index has 32 bits, so it cannot lead further.
     return source.readShared(
         place.offset, std::min<std::uint64_t>(place.length, std::numeric_limits<std::uint32_t>::max()));
 }

@@ -14,7 +14,7 @@ namespace {
 
 constexpr std::size_t kScatterRecordSize = 24;
 
-/// Offset 36: digest size and type stand at the same place in every version.
+/// Offset 36: digest size and type are at the same place in every version.
 constexpr std::size_t kDigestFieldsOffset = 36;
 
 struct Header {
@@ -144,7 +144,7 @@ CodeDirectory CodeDirectory::parse(SharedBytes blob) {
 std::optional<Data> CodeDirectory::specialSlotDigest(std::uint32_t slot) const {
     if (slot == 0 || slot > specialSlots_) return std::nullopt;
     const std::size_t size = digestSize(digestType_);
-    // parse() has shown that all special slots lie between the header and the hash offset.
+    // parse() has checked that all special slots are between the header and the hash offset.
     ByteReader reader = ByteReader(bytes_).sub(hashOffset_ - size * slot, size, "special slot");
     const ByteView stated = reader.bytes(size, "special slot");
     const bool zero =

@@ -1,5 +1,5 @@
-// The code directory: what a signature says about one piece of code, in one digest type. All integers are
-// big-endian; offsets count from its start.
+// The code directory: the statements of a signature about one piece of code, in one digest type. All integers
+// are big-endian; offsets count from its start.
 //
 // | Offset | Size | Field                                   | From version |
 // |--------|------|-----------------------------------------|--------------|
@@ -25,10 +25,10 @@
 // | 88     | 4    | runtime                                 | 0x20500      |
 // | 92     | 4    | pre-encryption hash offset, 0: none     | 0x20500      |
 //
-// The digest of special slot n stands n digests before the hash offset, those of the code slots from it on. A
-// scatter vector is a list of 24-byte records, ended by one whose count (its first four bytes) is zero.
-// Refused: whatever an offset or a count leads to that does not lie wholly behind the header and inside the
-// blob, a string without its end, a digest size that is not its type's, another version.
+// The digest of special slot n is n digests before the hash offset; the digests of code slots begin at it. A
+// scatter vector is a list of 24-byte records, ended by a record whose count (its first four bytes) is zero.
+// Refused: an offset or a count that leads into the header or out of the blob, an unterminated string, a
+// digest size that does not match its type, another version.
 #pragma once
 
 #include <cstdint>
@@ -60,12 +60,12 @@ std::size_t codeDirectoryHeaderSize(std::uint32_t version);
 /// A well-formed code directory. A value: it shares its bytes.
 class CodeDirectory {
   public:
-    /// `blob` with its header and nothing behind it. Throws CodeError or foundation::ShortRead when it is not
+    /// `blob` has its header and no trailing bytes. Throws CodeError or foundation::ShortRead if it is not
     /// well formed.
     static CodeDirectory parse(SharedBytes blob);
 
-    /// The digest type a code directory claims, which may be none of ours. Throws as parse() does when `blob`
-    /// is too short to tell, or no code directory.
+    /// The digest type that a code directory claims, possibly an unknown one. Throws like parse() if `blob`
+    /// is too short, or not a code directory.
     static std::uint8_t digestTypeNumberOf(ByteView blob);
 
     std::uint32_t version() const noexcept { return version_; }
@@ -75,8 +75,8 @@ class CodeDirectory {
     const std::optional<std::string>& teamIdentifier() const noexcept { return teamIdentifier_; }
     const SharedBytes& bytes() const noexcept { return bytes_; }
 
-    /// The digest that special slot `slot` (from 1 on) demands of its component; nothing when the directory
-    /// has no such slot or its digest is all zero, which demands nothing.
+    /// The required digest of the component of special slot `slot` (from 1 on). `nullopt` if the directory
+    /// has no such slot, or its digest is all zero, which requires nothing.
     std::optional<Data> specialSlotDigest(std::uint32_t slot) const;
 
     /// The cdhash.

@@ -1,5 +1,5 @@
-// The one failure type inside this folder. The service's methods turn it into a status; nothing throws past
-// them.
+// The only failure type inside this folder. The service's methods turn it into a status, and let no exception
+// out.
 #pragma once
 
 #include <stdexcept>
@@ -20,7 +20,7 @@ class CodeError : public std::runtime_error {
     Status status_;
 };
 
-/// A signature that is there and is wrong.
+/// Refuses a signature that is present and wrong.
 [[noreturn]] inline void refuse(const std::string& reason) {
     throw CodeError(kInvalidSignature, reason);
 }

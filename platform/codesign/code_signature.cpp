@@ -12,7 +12,7 @@ namespace pinwell::codesign {
 
 namespace {
 
-/// The special slots whose component travels with the signature.
+/// The special slots whose component is in the signature.
 constexpr std::uint32_t kCoveredSlots[] = {kSlotRequirements, kSlotEntitlements, kSlotTrailer,
                                            kSlotDerEntitlements};
 

@@ -1,4 +1,4 @@
-// A signature as a whole, wherever it was stored: its code directories, the components they cover, and the
+// A whole signature, from any kind of storage: its code directories, the components they cover, and the
 // signer's CMS message.
 #pragma once
 
@@ -11,33 +11,33 @@
 
 namespace pinwell::codesign {
 
-/// The parts of a signature, by slot, each with its blob header; the CMS message without. What a signature
-/// lacks is not in here.
+/// The parts of a signature, by slot, each with its blob header; the CMS message without it. Missing parts
+/// have no entry.
 struct SignatureComponents {
     std::map<std::uint32_t, SharedBytes> blobs;
     SharedBytes cms;
 };
 
-/// The components of a superblob, which they share; those that nothing here asks for are left behind. Throws
-/// CodeError or foundation::ShortRead.
+/// The components of a superblob, which they share; unneeded components are left out. Throws CodeError or
+/// foundation::ShortRead.
 SignatureComponents componentsOfSuperBlob(const SharedBytes& superblob);
 
 /// A signature whose code directories are well formed. Immutable.
 class CodeSignature {
   public:
-    /// Nothing when there is no code directory at all, as in a superblob that carries only a ticket.
-    /// Components are added under their special slot's number before, the trailer of a disk image for one.
-    /// Throws CodeError or foundation::ShortRead when a code directory is not well formed, when there are too
-    /// many or two of one digest type, or when only alternates are there. An alternate of an unknown digest
-    /// type is passed over.
+    /// Returns `nullopt` if there is no code directory, as in a superblob with only a ticket. Before the
+    /// call, outside components are added under the number of their special slot, such as a disk image's
+    /// trailer. Throws CodeError or foundation::ShortRead if a code directory is not well formed, if there
+    /// are too many or two of one digest type, or if there are only alternates. An alternate of an unknown
+    /// digest type is skipped.
     static std::optional<CodeSignature> parse(SignatureComponents components);
 
-    /// Static validity: throws CodeError (kInvalidSignature) when a component has not the digest that a code
-    /// directory demands of it, or when there is neither a CMS message that verifies over the primary code
-    /// directory nor, with the ad-hoc flag, none at all.
+    /// Checks static validity. Throws CodeError (kInvalidSignature) if a component does not have the digest
+    /// that a code directory requires. Throws it too unless a CMS message verifies over the primary code
+    /// directory, or the ad-hoc flag is set and there is no message.
     void requireValid() const;
 
-    /// `sets` as for CodeSigningService::copySigningInformation.
+    /// `sets` is as for CodeSigningService::copySigningInformation.
     SigningInformation information(std::uint32_t sets) const;
 
   private:
@@ -47,7 +47,7 @@ class CodeSignature {
 
     SignatureComponents components_;
     std::vector<CodeDirectory> directories_;  // the strongest first, the others in slot order
-    SharedBytes primary_;                     // slot 0, which the CMS message is over
+    SharedBytes primary_;                     // slot 0, which the CMS message signs
 };
 
 }  // namespace pinwell::codesign

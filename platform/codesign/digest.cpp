@@ -67,8 +67,8 @@ int digestStrength(DigestType type) {
     return 0;
 }
 
-// The library's digests fail only for want of memory, or where a local policy forbids one of them. Neither is
-// a property of the file, so both end the question like any other want of resources.
+// The library's digests fail only without memory, or if a local policy forbids one of them. Neither is a
+// property of the file, so both are handled like a lack of memory.
 Hasher::Hasher(DigestType type) : state_(std::make_unique<State>(State{type, nullptr})) {
     state_->context.reset(EVP_MD_CTX_new());
     if (!state_->context || EVP_DigestInit_ex(state_->context.get(), algorithm(type), nullptr) != 1) {

@@ -19,19 +19,19 @@ namespace pinwell::codesign {
 
 using foundation::ByteView;
 
-/// The type with this number; nothing when it is not one of ours.
+/// The type with this number; `nullopt` for an unknown number.
 std::optional<DigestType> digestTypeNumbered(std::uint8_t number);
 
 /// Bytes that a digest of this type takes in a code directory.
 std::size_t digestSize(DigestType type);
 
-/// Bytes of the cdhash of a code directory of this type; the same table stands in the ticket payload.
+/// Bytes of the cdhash of a code directory of this type; the ticket payload uses the same sizes.
 std::size_t codeHashSize(DigestType type);
 
-/// Where a type stands when the strongest code directory is chosen; the higher one wins.
+/// The rank of a type for choosing the strongest code directory; the highest wins.
 int digestStrength(DigestType type);
 
-/// A digest over bytes that come piece by piece.
+/// A digest over several pieces of bytes.
 class Hasher {
   public:
     explicit Hasher(DigestType type);
@@ -41,7 +41,7 @@ class Hasher {
 
     void update(ByteView bytes);
 
-    /// digestSize() bytes; the hasher is used up.
+    /// Returns digestSize() bytes; do not use the hasher afterwards.
     Data finish();
 
   private:

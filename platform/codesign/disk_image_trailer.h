@@ -5,8 +5,8 @@
 // |--------|------|-------------------------------------------|
 // | 0      | 4    | "koly"                                    |
 // | 4      | 4    | version, 4                                |
-// | 296    | 8    | signature offset, 0 when unsigned         |
-// | 304    | 8    | signature length, 0 when unsigned         |
+// | 296    | 8    | signature offset, 0 if unsigned           |
+// | 304    | 8    | signature length, 0 if unsigned           |
 #pragma once
 
 #include <cstdint>
@@ -24,19 +24,19 @@ inline constexpr std::uint32_t kSlotTrailer = 6;
 /// A disk image's trailer. A value.
 class DiskImageTrailer {
   public:
-    /// The trailer at the end of `source`; nothing when it does not end in one. Throws CodeError only when
-    /// the bytes cannot be read.
+    /// The trailer at the end of `source`; `nullopt` if there is none. Throws CodeError only if the bytes
+    /// cannot be read.
     static std::optional<DiskImageTrailer> read(const ByteSource& source);
 
-    /// Where the trailer itself begins.
+    /// The offset of the trailer itself.
     std::uint64_t offset() const noexcept { return offset_; }
 
-    /// Where the trailer says the signature stands; nothing when offset or length is zero. Nothing is
-    /// checked.
+    /// The signature's place according to the trailer, unchecked; `nullopt` if offset or length is
+    /// zero.
     std::optional<FileRange> signature() const;
 
-    /// Where the signed part of the image ends: at a signature that ends at the trailer, else at the trailer.
-    /// So an image has the same signed part before and after something was put in front of its trailer.
+    /// The end of the image's signed part: the start of a signature that ends at the trailer, otherwise the
+    /// trailer. So inserting a signature before the trailer does not change the signed part.
     std::uint64_t signedLimit() const;
 
     /// The bytes that a signature covers: the trailer with both of its signature fields zeroed.

@@ -25,10 +25,10 @@ constexpr std::size_t kThinHeaderSize64 = 32;
 constexpr std::uint32_t kLoadCommandHeaderSize = 8;
 constexpr std::uint32_t kSignatureCommandSize = 16;
 
-/// What is read at once of a list. Most lists of load commands fit.
+/// Bytes of a list read at once. Most lists of load commands fit.
 constexpr std::size_t kPieceSize = std::size_t{16} * 1024;
 
-/// The bytes of a range of a file, in order, of which one piece is in memory at a time.
+/// Reads the bytes of a file's range in order, with one piece in memory at a time.
 class PieceReader {
   public:
     /// `range` must lie within `source`.
@@ -157,7 +157,7 @@ std::vector<ImageSlice> readUniversal(const ByteSource& source) {
 /// The signature that the load commands give, relative to the image.
 std::optional<FileRange> walkLoadCommands(PieceReader commands, bool bigEndian, std::uint32_t count) {
     std::optional<FileRange> found;
-    // Every command takes eight bytes of a bounded space at least, so a count that lies ends the walk early.
+    // Every command takes at least eight bytes of a bounded space, so a false count ends the walk early.
     for (std::uint32_t i = 0; i < count; ++i) {
         OrderedReader header(commands.next(kLoadCommandHeaderSize, "a load command"), bigEndian);
         const std::uint32_t command = header.u32("load command");

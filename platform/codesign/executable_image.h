@@ -1,4 +1,4 @@
-// Executable images, as far as finding their signature needs it.
+// The parts of executable images that locate their signature.
 //
 // A thin image, in the byte order that its magic shows:
 //
@@ -24,12 +24,12 @@
 // | 8      | 32 a slice | CPU type, CPU subtype (4 each), offset, size (8 each), alignment, spare (4)   |
 //
 // Each slice is a thin image. Refused: no slices, slices that overlap each other or the list, slices that
-// reach past the file, two slices of one CPU type and subtype (a loader takes one of them, and not
-// necessarily the one whose hash was asked for); load commands that do not fit the space set aside for them,
-// two that give a signature, a signature that overlaps the load commands or reaches past its slice.
+// reach past the file, two slices of one CPU type and subtype (a loader may take another than the one whose
+// hash was looked up); load commands that do not fit their reserved space, two that give a signature, a
+// signature that overlaps the load commands or reaches past its slice.
 //
 // There is no limit on the number of slices or load commands. Both lists are read piece by piece, so that
-// work and memory grow with what is in the file and not with what it claims.
+// work and memory grow with the file's contents and not with its claims.
 #pragma once
 
 #include <cstdint>
@@ -44,7 +44,7 @@ inline constexpr std::uint32_t kCpuType64Arm = 0x0100000C;
 inline constexpr std::uint32_t kCpuType64X86 = 0x01000007;
 inline constexpr std::uint32_t kLoadCommandSignature = 0x1D;
 
-/// The upper byte of a CPU subtype says what the code makes use of, not what it runs on.
+/// The upper byte of a CPU subtype describes features of the code, not the processor.
 inline constexpr std::uint32_t kCpuSubtypeCapabilities = 0xFF000000;
 
 /// A part of a file.
@@ -55,24 +55,24 @@ struct FileRange {
     bool operator==(const FileRange&) const = default;
 };
 
-/// One thin image and where it stands in its file.
+/// One thin image and its place in the file.
 struct ImageSlice {
     std::uint32_t cpuType = 0;
-    std::uint32_t cpuSubtype = 0;  // as stated, capabilities included
+    std::uint32_t cpuSubtype = 0;  // as stated, with capabilities
     FileRange range;
 };
 
-/// Whether the first bytes are those of an executable image. Throws CodeError only when they cannot be read.
+/// Whether the file begins like an executable image. Throws CodeError only if it cannot be read.
 bool isExecutableImage(const ByteSource& source);
 
 /// The slices of a universal image, or the whole of a thin one; at least one. Throws CodeError.
 std::vector<ImageSlice> readSlices(const ByteSource& source);
 
-/// The slice that stands for all: the first of CPU type 0x0100000C, else the first of 0x01000007, else the
-/// first; the same on every host, so that every host asks for the same ticket.
+/// The slice that represents all: the first of CPU type 0x0100000C, otherwise the first of 0x01000007,
+/// otherwise the first. The same on every host, so that every host looks up the same ticket.
 const ImageSlice& preferredSlice(const std::vector<ImageSlice>& slices);
 
-/// Where the signature of a slice stands in the file; nothing when it is not signed. Throws CodeError or
+/// The place of a slice's signature in the file; `nullopt` if it is not signed. Throws CodeError or
 /// foundation::ShortRead.
 std::optional<FileRange> findImageSignature(const ByteSource& source, const ImageSlice& slice);
 

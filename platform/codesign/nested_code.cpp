@@ -38,7 +38,7 @@ class BundleWalk {
     std::vector<CodeSignature> take() && { return std::move(found_); }
 
   private:
-    // Of the item itself, a link not followed; 0 when it cannot be looked at.
+    // The type of the item itself, without following a link; 0 if stat fails.
     mode_t typeOf(const std::string& path) const {
         const auto place = access_.places->find(path);
         const auto status = place ? place->status() : place.error();
@@ -52,7 +52,7 @@ class BundleWalk {
         if (!opened) return result;
         const DirectoryStream stream(fdopendir(opened->get()));
         if (!stream) return result;
-        static_cast<void>(opened->release());  // the stream's now
+        static_cast<void>(opened->release());  // the stream owns it now
         while (const dirent* const entry = readdir(stream.get())) {
             const std::string name(&entry->d_name[0]);
             if (name == "." || name == "..") continue;
@@ -72,7 +72,7 @@ class BundleWalk {
             for (const CodeSignature& signature : signatures) signature.requireValid();
             std::move(signatures.begin(), signatures.end(), std::back_inserter(found_));
         } catch (const CodeError&) {
-            // Passed over: what the bundle carries beside good code does not make the good code unknown.
+            // Skipped: bad code in the bundle must not hide the good code.
         } catch (const foundation::ShortRead&) {
         }
     }

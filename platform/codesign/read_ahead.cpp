@@ -14,7 +14,7 @@ ReadAhead::ReadAhead(const ByteSource& source, std::uint64_t end)
     try {
         reader_ = std::thread([this] { run(); });
     } catch (const std::system_error&) {
-        // No more threads for this user or in this container: slower, and no worse.
+        // No more threads for this user or in this container: it is only slower.
     }
 }
 
@@ -48,7 +48,7 @@ void ReadAhead::read(std::uint64_t number) const {
     source_.read(number * kReadAheadPieceSize, piece(number));
 }
 
-// The caller is done with all pieces before this one.
+// The caller has finished all pieces before this one.
 void ReadAhead::waitUntilRead(std::uint64_t number) {
     std::unique_lock lock(mutex_);
     returned_ = number;

@@ -1,5 +1,5 @@
-// The bytes of a source piece by piece, read on a thread of their own while the caller works on the pieces
-// before. Memory is fixed: kReadAheadPieces buffers of kReadAheadPieceSize bytes, whatever the size of the
+// Reads a source piece by piece on its own thread while the caller works on earlier pieces. Memory
+// is fixed: kReadAheadPieces buffers of kReadAheadPieceSize bytes, for any size of the
 // source.
 #pragma once
 
@@ -15,25 +15,25 @@
 
 namespace pinwell::codesign {
 
-/// Large enough that handing pieces over costs nothing beside reading them, small enough to stay in the
+/// Large enough that passing pieces is cheap compared with reading them, small enough to stay in the
 /// processor's caches between the two threads.
 inline constexpr std::size_t kReadAheadPieceSize = 512 * 1024;
 inline constexpr std::size_t kReadAheadPieces = 4;
 
-/// For one thread, the caller's. What fits into one piece is read on it, and so is everything where no other
-/// thread is to be had.
+/// For one thread, the caller's. It reads on that thread if the source fits into one piece, or if no other
+/// thread can be started.
 class ReadAhead {
   public:
     /// Reads the bytes of `source`, which must outlive this object, from the first to before `end`.
     ReadAhead(const ByteSource& source, std::uint64_t end);
 
-    /// Stops reading; what was not asked for is dropped.
+    /// Stops reading; unused pieces are dropped.
     ~ReadAhead();
     ReadAhead(const ReadAhead&) = delete;
     ReadAhead& operator=(const ReadAhead&) = delete;
 
-    /// The next piece, good until the next call; an empty one at the end. Throws what reading it threw, as
-    /// ByteSource::read does; no more pieces may be asked for then.
+    /// The next piece, valid until the next call; an empty one at the end. Throws like ByteSource::read; then
+    /// do not call it again.
     ByteView next();
 
   private:
@@ -48,12 +48,12 @@ class ReadAhead {
     const std::uint64_t end_;
     const std::uint64_t count_;
     std::array<Buffer, kReadAheadPieces> buffers_;  // piece n is in n modulo their number
-    std::uint64_t asked_ = 0;                       // pieces that the caller has asked for
+    std::uint64_t asked_ = 0;                       // pieces that the caller has requested
 
     std::mutex mutex_;
     std::condition_variable changed_;
     std::uint64_t read_ = 0;      // pieces that have been read
-    std::uint64_t returned_ = 0;  // pieces that the caller is done with
+    std::uint64_t returned_ = 0;  // pieces that the caller has finished
     bool stopping_ = false;
     std::exception_ptr failure_;
     std::thread reader_;  // last: it uses all of the above

@@ -12,12 +12,12 @@ namespace pinwell::codesign {
 
 namespace {
 
-/// What a signer may be asked to write; those in use are about as long as a domain name.
+/// Longest identifier; real ones are about as long as a domain name.
 constexpr std::size_t kMaximumIdentifierLength = 1024;
 
 constexpr std::uint32_t kRequiredValidityFlags = kDoNotValidateExecutable | kDoNotValidateResources;
 
-/// Runs `body`, which answers a status; what it throws becomes one.
+/// Runs `body`, which returns a status; turns its exceptions into a status.
 template <class Body>
 Status asStatus(Body body) {
     try {
@@ -118,7 +118,7 @@ Status FileCodeSigningService::copyAllCodeHashes(const URL& path, std::vector<Si
             std::vector<CodeSignature> nested = findNestedSignatures(path.path(), access_);
             std::move(nested.begin(), nested.end(), std::back_inserter(signatures));
         }
-        // The walk has met the main executable again, and one library may lie in many places.
+        // The walk finds the main executable again, and a library may be in several places.
         std::set<std::vector<Data>> known;
         std::vector<SigningInformation> found;
         for (const CodeSignature& signature : signatures) {

@@ -77,7 +77,7 @@ bool isBelow(std::string_view arc, ByteView identifier) {
     return identifier.size() > arc.size() && is(identifier.first(arc.size()), arc);
 }
 
-/// Null for one that is not known here.
+/// Returns null for an unknown one.
 const EVP_MD* digestNamed(ByteView identifier) {
     const auto* const found = std::ranges::find_if(
         kDigests, [&](const KnownDigest& digest) { return is(identifier, digest.identifier); });

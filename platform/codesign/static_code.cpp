@@ -8,7 +8,7 @@ namespace pinwell::codesign {
 
 namespace {
 
-/// A whole file of the separate form; nothing when it is not there.
+/// A whole file of the separate form; `nullopt` if it does not exist.
 std::optional<SharedBytes> readSignatureFile(const foundation::Places& places, const std::string& path) {
     try {
         const FileSource file(places, path);

@@ -1,4 +1,4 @@
-// Code at a path: what kind of file stands for it and where its signature is kept.
+// Code at a path: the file that represents it and the place of its signature.
 //
 // | At the path                            | Stands for it       | Signature                             |
 // |----------------------------------------|---------------------|---------------------------------------|
@@ -9,8 +9,8 @@
 // | a directory, its executable no image   | the main executable | three files in Contents/_CodeSignature |
 //
 // The files of that separate form are `CodeDirectory` and `CodeRequirements`, blobs as in a superblob, and
-// `CodeSignature`, the bare CMS message. Whatever ends in a trailer is no executable image.
-// A link in the last component is not followed, neither here nor for the files of the separate form.
+// `CodeSignature`, the bare CMS message. A file that ends in a trailer is not an executable image. A link in
+// the last component is not followed, here and for the files of the separate form.
 #pragma once
 
 #include <functional>
@@ -26,11 +26,11 @@
 
 namespace pinwell::codesign {
 
-/// The path of the main executable of a directory opened as a bundle; nothing when it has none.
+/// The path of the main executable of a directory opened as a bundle; `nullopt` if it has none.
 using MainExecutableFinder =
     std::function<std::optional<std::string>(foundation::Places&, const std::string& bundlePath)>;
 
-/// How code is found. Copies share the places.
+/// Access to code. Copies share the places.
 struct CodeAccess {
     std::shared_ptr<foundation::Places> places;
     MainExecutableFinder finder;
@@ -38,17 +38,17 @@ struct CodeAccess {
 
 enum class CodeKind { executableImage, diskImage, opaqueFile, separatelySigned };
 
-/// The components of a signature in separate files, by the directory that they stand in; nothing when there
-/// is no code directory. Throws CodeError.
+/// The components of a signature in separate files, from their directory; `nullopt` if there is no code
+/// directory. Throws CodeError.
 std::optional<SignatureComponents> componentsOfSeparateFiles(const foundation::Places& places,
                                                              const std::string& directory);
 
-/// The StaticCode of this service. Holds the file and its bundle open, so that all answers are about one file
-/// even when its path gets another; keeps the signature once it was read. Nothing is reached through a link
-/// that leads out of the bundle.
+/// The StaticCode of this service. Keeps the file and its bundle open, so that all results are about one file
+/// even if its path changes; keeps the signature after reading it. Links that lead out of the bundle are not
+/// followed.
 class FileCode final : public StaticCode {
   public:
-    /// Throws CodeError: kStaticCodeNotFound when nothing there could be code, kIOError when it cannot be
+    /// Throws CodeError: kStaticCodeNotFound if nothing there could be code, kIOError if it cannot be
     /// read.
     static std::shared_ptr<FileCode> atPath(const std::string& path, const CodeAccess& access);
 
@@ -56,7 +56,7 @@ class FileCode final : public StaticCode {
     bool inBundle() const noexcept { return !signatureDirectory_.empty(); }
     const std::string& file() const noexcept { return file_; }
 
-    /// The components of its signature in separate files, as componentsOfSeparateFiles().
+    /// The components of its signature in separate files, like componentsOfSeparateFiles().
     std::optional<SignatureComponents> separateComponents() const {
         return componentsOfSeparateFiles(*places_, signatureDirectory_);
     }
@@ -64,21 +64,21 @@ class FileCode final : public StaticCode {
     const ByteSource& source() const noexcept { return *source_; }
     const std::optional<DiskImageTrailer>& trailer() const noexcept { return trailer_; }
 
-    /// Where a disk image's trailer says the superblob stands; nothing when unsigned, or no disk image.
-    /// Throws CodeError when it reaches into the trailer.
+    /// The superblob's place according to a disk image's trailer; `nullopt` if unsigned, or not a disk image.
+    /// Throws CodeError if it reaches into the trailer.
     std::optional<FileRange> diskImageSignature() const;
 
-    /// What the file itself adds to the components that a superblob carries.
+    /// Adds the components in the file itself to the components of a superblob.
     SignatureComponents completed(SignatureComponents components) const;
 
-    /// The signature; nothing when the code is not signed. Throws CodeError or foundation::ShortRead.
+    /// The signature; `nullopt` if the code is not signed. Throws CodeError or foundation::ShortRead.
     const std::optional<CodeSignature>& signature();
 
-    /// The signatures of all slices, in the order of the slices; the code's one signature where there are no
+    /// The signatures of all slices, in the order of the slices; the code's only signature if there are no
     /// slices. Unsigned slices have no entry. Throws CodeError or foundation::ShortRead.
     std::vector<CodeSignature> allSignatures();
 
-    /// Answers from the signature in `superblob` from now on. Throws CodeError or foundation::ShortRead.
+    /// Uses the signature in `superblob` from now on. Throws CodeError or foundation::ShortRead.
     void setDetachedSignature(const SharedBytes& superblob);
 
   private:
@@ -95,7 +95,7 @@ class FileCode final : public StaticCode {
     std::optional<DiskImageTrailer> trailer_;
     std::string signatureDirectory_;  // of a bundle; empty for a plain file
     std::shared_ptr<foundation::Places> places_;
-    foundation::Anchor anchor_;  // of the path that the code was asked for by
+    foundation::Anchor anchor_;  // of the code's path
     std::optional<CodeSignature> signature_;
     bool signatureRead_ = false;
 };

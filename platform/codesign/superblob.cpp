@@ -53,8 +53,8 @@ SurveyedBlob surveyBlob(ByteView superblob, std::uint32_t slot, std::uint32_t of
     return blob;
 }
 
-// Shows `visit` one entry of the index after the other, while it returns true. Returns the count as stated, 0
-// where there is none.
+// Passes the entries of the index to `visit` while it returns true. Returns the stated count, or 0 without a
+// header.
 template <class Visit>
 std::uint32_t survey(ByteView superblob, Visit visit) {
     std::uint32_t count = 0;
@@ -68,7 +68,7 @@ std::uint32_t survey(ByteView superblob, Visit visit) {
             if (!visit(surveyBlob(superblob, slot, offset))) break;
         }
     } catch (const foundation::ShortRead&) {
-        // An entry that is cut off is none.
+        // A truncated entry is ignored.
     }
     return count;
 }
@@ -92,7 +92,7 @@ std::vector<Blob> parseSuperBlob(ByteView superblob) {
     ByteReader index = whole;
     index.seek(8, "superblob count");
     const std::uint32_t count = index.be32("superblob count");
-    // Before anything is sized by it.
+    // Checked before the count sizes anything.
     static_cast<void>(index.sub(index.position(), std::uint64_t{kIndexEntrySize} * count, "superblob index"));
 
     std::vector<Blob> blobs;

@@ -4,18 +4,18 @@
 // | Offset     | Size      | Field                                                        |
 // |------------|-----------|--------------------------------------------------------------|
 // | 0          | 4         | magic FADE0CC0                                               |
-// | 4          | 4         | length of the whole, this header included                    |
+// | 4          | 4         | length of the whole, with this header                        |
 // | 8          | 4         | count of index entries                                       |
 // | 12         | 8 x count | index: slot (4), offset of the blob (4)                      |
-// | behind it  |           | blobs: magic (4), length with these 8 bytes (4), payload     |
+// | after it   |           | blobs: magic (4), length with these 8 bytes (4), payload     |
 //
-// The index may name the blobs in any order, and gaps may lie between them. What follows the superblob's own
-// length in the area set aside for it is padding and is never looked at.
+// The index may name the blobs in any order, and there may be gaps between them. The rest of the reserved
+// area after the superblob's own length is padding and is never read.
 //
 // Refused: a wrong magic, a length or count that does not fit, two entries for a slot of the signature, and
-// blobs that overlap each other or the index. Other slots, that of the ticket for one, may have any number of
-// entries. There is no limit on the length or on the number of blobs: a record here takes 40 bytes for the 16
-// that the smallest blob takes in the file.
+// blobs that overlap each other or the index. Other slots, such as the ticket's, may have any number of
+// entries. There is no limit on the length or on the number of blobs: a record here takes 40 bytes; the
+// smallest blob takes 16 in the file.
 #pragma once
 
 #include <cstdint>
@@ -30,7 +30,7 @@ namespace pinwell::codesign {
 
 inline constexpr std::uint32_t kSuperBlobMagic = 0xFADE0CC0;
 
-/// The blob around bytes that are no blob themselves, the CMS message for one.
+/// The blob around bytes that are not a blob themselves, such as the CMS message.
 inline constexpr std::uint32_t kWrapperMagic = 0xFADE0B01;
 
 inline constexpr std::size_t kSuperBlobHeaderSize = 12;
@@ -56,32 +56,32 @@ bool isSlotOfSignature(std::uint32_t slot);
 struct Blob {
     std::uint32_t slot;
     std::uint32_t magic;
-    ByteView bytes;  // header included
+    ByteView bytes;  // with its header
 };
 
-/// The blobs, in index order, as views of `superblob`, which may be followed by padding. Throws CodeError or
+/// The blobs, in index order, as views of `superblob`, which may have padding after it. Throws CodeError or
 /// foundation::ShortRead.
 std::vector<Blob> parseSuperBlob(ByteView superblob);
 
-/// An entry of an index, and what of its blob lies within the superblob.
+/// An entry of an index, and the part of its blob within the superblob.
 struct SurveyedBlob {
     std::uint32_t slot = 0;
     std::uint32_t offset = 0;             // as stated
-    std::optional<std::uint32_t> magic;   // nothing when no blob header stands at the offset
+    std::optional<std::uint32_t> magic;   // `nullopt` if there is no blob header at the offset
     std::optional<std::uint32_t> length;  // as stated
-    ByteView bytes;                       // from the offset, as long as stated or as there are
+    ByteView bytes;                       // from the offset, up to the stated length or the end
 };
 
-/// What an index lists, whatever is wrong with it or with the blobs: for showing a superblob that
-/// parseSuperBlob refuses. The first `maximum` entries; `count` becomes what the header states, 0 when there
-/// is none.
+/// The entries of an index, despite faults in it or in the blobs: to show a superblob that
+/// parseSuperBlob refuses. The first `maximum` entries; `count` becomes the header's count, or 0 without
+/// a header.
 std::vector<SurveyedBlob> surveySuperBlob(ByteView superblob, std::size_t maximum, std::uint32_t& count);
 
 /// The last entry for `slot` whose blob has a header, by the same rules; `nullopt` if there is none.
 std::optional<SurveyedBlob> surveyLastBlobOf(std::uint32_t slot, ByteView superblob);
 
-/// The superblob that stands in `source` at `offset`, in an area of `areaLength` bytes, without its padding.
-/// Only the superblob itself is read. Throws CodeError.
+/// The superblob in `source` at `offset`, in an area of `areaLength` bytes, without its padding. Only the
+/// superblob itself is read. Throws CodeError.
 SharedBytes readSuperBlob(const ByteSource& source, std::uint64_t offset, std::uint64_t areaLength);
 
 /// The superblob of these blobs (slot, bytes with header), back to back in this order.

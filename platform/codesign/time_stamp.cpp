@@ -21,7 +21,7 @@ constexpr const char* kTimeStamp = "the time stamp";
     refuse("the time stamp's time is malformed");
 }
 
-/// The digits of a time, from the front.
+/// The digits of a time, from the start.
 class TimeReader {
   public:
     explicit TimeReader(std::string_view text) : rest_(text) {}
@@ -35,7 +35,7 @@ class TimeReader {
         return value;
     }
 
-    // A fraction has a digit at least, and no trailing zero is asked for.
+    // A fraction has at least one digit; trailing zeros are accepted.
     void fractionAndZone() {
         if (!rest_.empty() && rest_.front() == '.') {
             take();
@@ -60,7 +60,7 @@ Date parseTime(ByteView text) {
     using namespace std::chrono;
     const std::string characters = foundation::toString(text);
     TimeReader reader(characters);
-    // Braces: the parts are read in their order.
+    // Braces: they evaluate the parts in order.
     const year_month_day date{year(static_cast<int>(reader.digits(4))), month(reader.digits(2)),
                               day(reader.digits(2))};
     const unsigned hour = reader.digits(2);

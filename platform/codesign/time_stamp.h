@@ -12,14 +12,14 @@
 
 namespace pinwell::codesign {
 
-/// The views are into the bytes that it was parsed from.
+/// The views refer to the parsed bytes.
 struct TimeStamp {
     Algorithm imprintAlgorithm;
     foundation::ByteView imprint;
     foundation::Date time;  // without the fraction
 };
 
-/// Reads a TSTInfo that fills `bytes`. What follows the time in it is not looked at. Throws CodeError.
+/// Reads a TSTInfo that fills `bytes`. Fields after the time are not read. Throws CodeError.
 TimeStamp parseTimeStamp(foundation::ByteView bytes);
 
 }  // namespace pinwell::codesign
