@@ -9,7 +9,7 @@
 namespace pinwell::trust {
 namespace {
 
-/// Lines for one file; what is damaged beyond that is counted.
+/// Maximum lines for one file; further damaged blocks are counted.
 constexpr std::size_t kMaximumReports = 16;
 
 }  // namespace
@@ -39,7 +39,7 @@ void readDeniedPem(ByteView text, DenyList& into, const std::function<void(const
     for (const PemBlock& block : readPemBlocks(asText(text))) {
         std::string_view damage = block.damage;
         if (block.data) {
-            // What OpenSSL writes as "trusted" is a certificate with more behind it.
+            // OpenSSL's "trusted" form is a certificate with trailing data.
             if (!isCertificateBlock(block) && block.label != "TRUSTED CERTIFICATE") continue;
             if (X509CertificateRef certificate = X509Certificate::parse(*block.data)) {
                 into.add(certificate);

@@ -1,4 +1,4 @@
-// Bytes as a text: to search in, and as the key of a table; and the white space of a text.
+// Bytes as a text, for searching and for keys of a table; and the white space of a text.
 #pragma once
 
 #include <string_view>
@@ -12,7 +12,7 @@ inline std::string_view asText(foundation::ByteView bytes) {
     return {static_cast<const char*>(static_cast<const void*>(bytes.data())), bytes.size()};
 }
 
-/// Not the C library's, which asks the locale.
+/// Unlike the C library's function, independent of the locale.
 constexpr bool isSpace(char c) {
     return c == ' ' || (c >= '\t' && c <= '\r');
 }

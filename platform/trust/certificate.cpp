@@ -10,7 +10,8 @@
 namespace pinwell::trust {
 namespace {
 
-/// SHA-1 of the key's bits names a key where nothing else does (RFC 5280, 4.2.1.2). It vouches for nothing.
+/// SHA-1 of the key's bits identifies a key without an identifier (RFC 5280, 4.2.1.2). Nothing relies on it
+/// for security.
 std::string keyIdentifier(ByteView subjectKey, const CertificateExtensions& extensions) {
     if (extensions.subjectKeyIdentifier) return foundation::toHex(*extensions.subjectKeyIdentifier);
     der::Cursor cursor(subjectKey);
@@ -36,7 +37,7 @@ void X509Certificate::read() {
     if (parts_.extensions) extensions_ = readExtensions(*parts_.extensions);
     const std::string text =
         subject_.summary.empty() ? keyIdentifier(parts_.subjectKey, extensions_) : subject_.summary;
-    // Escaped here: every use of it is a text for people, and its author is whoever made the certificate.
+    // Escaped here: every use is a text for people, and the text comes from the certificate's maker.
     summary_ = foundation::escapeForTerminal(text);
 }
 

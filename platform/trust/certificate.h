@@ -1,4 +1,4 @@
-// A parsed certificate with all that chains and checks ask of it.
+// A parsed certificate with all fields that chains and checks need.
 #pragma once
 
 #include <memory>
@@ -13,7 +13,8 @@
 
 namespace pinwell::trust {
 
-/// Everything but the key that verifies is read when it is made; any number of threads may ask afterwards.
+/// All fields except the verifying key are read by the constructor; afterwards any number of threads may use
+/// it.
 class X509Certificate final : public Certificate {
   public:
     /// Null unless `der` is exactly one well-formed certificate of at most kMaximumCertificateSize bytes.
@@ -35,22 +36,22 @@ class X509Certificate final : public Certificate {
     /// Views into `der`.
     const CertificateParts& parts() const noexcept { return parts_; }
 
-    /// Whether subject and issuer are the same name. Says nothing about the signature.
+    /// Whether subject and issuer are the same name. Does not check the signature.
     bool isSelfIssued() const noexcept { return subject_.canonical == issuer_.canonical; }
 
-    /// Null if it cannot be used: `readSubjectKey` says when, and a point may not be on its curve.
+    /// Null if it cannot be used: see `readSubjectKey`; or a point is not on its curve.
     const std::shared_ptr<const X509PublicKey>& publicKey() const;
 
-    /// Whether the signature rests on a digest that is not known to be sound.
+    /// Whether the signature uses a digest that is not known to be sound.
     bool hasWeakSignatureDigest() const noexcept { return algorithm_.isWeak(); }
 
     bool isNamedAsIssuerOf(const X509Certificate& other) const;
 
-    /// Whether this certificate's key verifies the other's signature. Not if the other names one algorithm
-    /// inside and another outside.
+    /// Whether this certificate's key verifies the other's signature. False if the other names two different
+    /// algorithms, inside and outside.
     bool verifiesSignatureOf(const X509Certificate& other) const;
 
-    /// Whether both are about the same subject and the same key, however they differ otherwise.
+    /// Whether both have the same subject and the same key; other differences do not matter.
     bool hasSameSubjectAndKeyAs(const X509Certificate& other) const;
 
   private:
@@ -68,7 +69,7 @@ class X509Certificate final : public Certificate {
     std::string summary_;
     bool algorithmsAgree_ = false;
 
-    // Made when it is first asked for: of a thousand anchors, a chain needs one.
+    // Made on first use: a chain needs only one of a thousand anchors.
     mutable std::once_flag keyMade_;
     mutable std::shared_ptr<const X509PublicKey> publicKey_;
 };

@@ -13,12 +13,12 @@ using BioHandle = Handle<BIO, BIO_free_all>;
 using NameHandle = Handle<X509_NAME, X509_NAME_free>;
 using ObjectHandle = Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
 
-/// Of a name that `readName` has read, so that its parts are well-formed and bounded in number.
+/// The text of a name that `readName` accepts, so its parts are well-formed and bounded in number.
 std::string nameText(const der::Element& encoded) {
     const unsigned char* at = unsignedBytes(encoded.whole);
     const NameHandle name(d2i_X509_NAME(nullptr, &at, static_cast<long>(encoded.whole.size())));
     const BioHandle text(BIO_new(BIO_s_mem()));
-    // UTF-8 stays readable; what could drive a terminal does not get through.
+    // UTF-8 stays readable; terminal control characters are escaped.
     const unsigned long flags = (XN_FLAG_RFC2253 & ~ASN1_STRFLGS_ESC_MSB) | ASN1_STRFLGS_ESC_CTRL;
     if (!name || !text || X509_NAME_print_ex(text.get(), name.get(), 0, flags) < 0) return {};
     char* bytes = nullptr;
@@ -39,7 +39,7 @@ foundation::Data negated(foundation::ByteView number) {
     return result;
 }
 
-/// Of the contents of an INTEGER, which are not empty.
+/// The text of an INTEGER's contents, which are not empty.
 std::string serialText(foundation::ByteView number) {
     const bool isNegative = (number.front() & std::byte{0x80}) != std::byte{0};
     const foundation::Data magnitude = isNegative ? negated(number) : foundation::toData(number);
@@ -56,7 +56,7 @@ foundation::Data fingerprint(foundation::ByteView der, const EVP_MD* digest) {
     return foundation::toData(byteView(bytes.data(), static_cast<int>(length)));
 }
 
-/// OpenSSL's long name of an identifier, which is bounded; the identifier itself where it has none.
+/// OpenSSL's long name of an identifier, of bounded length; the identifier itself if it has none.
 std::string oidName(const std::string& oid) {
     const ObjectHandle object(OBJ_txt2obj(oid.c_str(), 1));
     const int number = object ? OBJ_obj2nid(object.get()) : NID_undef;

@@ -1,4 +1,4 @@
-// What a certificate says, for showing it to people. Nothing here judges it.
+// The contents of a certificate, for people. Does not judge it.
 #pragma once
 
 #include <cstdint>
@@ -16,17 +16,17 @@ struct CertificateDescription {
     struct Extension {
         std::string oid;  // dotted
         bool critical = false;
-        bool malformed = false;  // cannot be read, or occurs more than once
+        bool malformed = false;  // unreadable, or occurs more than once
     };
 
     std::string subject;
     std::string issuer;
     std::string summary;       // as Certificate::subjectSummary
-    std::string serialNumber;  // hexadecimal, lower case, with a minus sign when it is negative
+    std::string serialNumber;  // hexadecimal, lower case, with a minus sign if negative
     foundation::Date notBefore;
     foundation::Date notAfter;
 
-    std::string keyType;  // "EC", "RSA", OpenSSL's name for any other; empty when the key cannot be read
+    std::string keyType;  // "EC", "RSA", OpenSSL's name for any other; empty if the key is unreadable
     int keyBits = 0;
     std::string curve;               // OpenSSL's name; of an elliptic-curve key alone
     std::string signatureAlgorithm;  // OpenSSL's long name, or a dotted OID
@@ -41,7 +41,7 @@ struct CertificateDescription {
     std::optional<foundation::Data> authorityKeyIdentifier;
 };
 
-/// Nothing unless `der` is exactly one certificate that TrustService::createCertificate would take.
+/// `nullopt` unless `der` is exactly one certificate that TrustService::createCertificate would accept.
 std::optional<CertificateDescription> describeCertificate(foundation::ByteView der);
 
 }  // namespace pinwell::trust

@@ -30,7 +30,7 @@ void readValidity(Cursor validity, CertificateParts& parts) {
     validity.expectEnd();
 }
 
-/// Takes the place of the tag BIT STRING: the contents are the same.
+/// The tag replaces that of BIT STRING: the contents are the same.
 void skipUniqueIdentifier(Cursor& body, std::uint32_t number, Version version) {
     const std::optional<Element> identifier = body.takeIf(contextTag(number, false));
     if (!identifier) return;

@@ -1,4 +1,4 @@
-// An X.509 certificate as its bytes have it (RFC 5280, 4.1), read without a library.
+// The structure of an X.509 certificate (RFC 5280, 4.1), read without a library.
 //
 //   Certificate     SEQUENCE { tbsCertificate, AlgorithmIdentifier, signature BIT STRING }
 //   tbsCertificate  SEQUENCE {
@@ -12,8 +12,8 @@
 //       [1] issuer's and [2] subject's unique identifier BIT STRING   from version 2
 //       [3] { Extensions } }        version 3 alone; extensions.h
 //
-// In DER: definite lengths in the shortest form, nothing left over anywhere, nothing nested deeper than
-// der::kMaximumNesting. Refused besides: other versions, and what an earlier version does not have.
+// In DER: definite lengths in the shortest form, no bytes left over, nesting at most der::kMaximumNesting.
+// Also refused: other versions, and fields that the stated version does not have.
 #pragma once
 
 #include <optional>
@@ -42,7 +42,7 @@ struct CertificateParts {
     foundation::ByteView signature;  // without the count of unused bits, which is 0
 };
 
-/// Throws der::Malformed unless `certificate` is exactly one.
+/// Throws der::Malformed unless `certificate` is exactly one certificate.
 CertificateParts readCertificateParts(foundation::ByteView certificate);
 
 }  // namespace pinwell::trust

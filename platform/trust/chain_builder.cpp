@@ -26,7 +26,7 @@ bool contains(const std::unordered_set<std::string_view>& bytes, const X509Certi
     return bytes.contains(asText(certificate.der()));
 }
 
-/// Whether the chain holds the certificate, or another of its subject and key.
+/// Whether the chain has the certificate, or another with its subject and key.
 bool repeats(const CertificateList& chain, const X509Certificate& candidate) {
     return std::any_of(chain.begin(), chain.end(), [&](const X509CertificateRef& member) {
         return member->der() == candidate.der() || member->hasSameSubjectAndKeyAs(candidate);
@@ -54,7 +54,7 @@ ChainBuilder::ChainBuilder(const CertificateList& given, const CertificateList& 
     addCandidates(platformAnchors);
     addCandidates(anchors.allowed);
     addCandidates(given);
-    // A chain whose distrusted root was left out of the list is a chain with a distrusted root all the same.
+    // A chain has a distrusted root even if the list leaves the root out.
     addCandidates(anchors.denied.certificates());
 }
 
@@ -80,9 +80,9 @@ bool ChainBuilder::show(const CertificateList& chain, const Visit& visit) {
     return visit(describe(chain));
 }
 
-/// Returns whether the search is over. An issuer whose key does not verify the signature is shown only if no
-/// certificate's key does, so that the chain can be seen with what is wrong in it; and not if its key
-/// identifier differs as well, for then it merely has the same name.
+/// Returns whether the search is over. An issuer whose key does not verify the signature is used only if no
+/// other certificate's key does, to show the faulty chain. It is not used if its key identifier differs too,
+/// because then only the name is the same.
 bool ChainBuilder::extend(CertificateList& chain, const Visit& visit) {
     const X509CertificateRef issued = chain.back();
     const bool canEnd = contains(platformAnchors_, *issued) || contains(allowed_, *issued);
@@ -119,7 +119,7 @@ bool ChainBuilder::extend(CertificateList& chain, const Visit& visit) {
     return !canEnd && show(chain, visit);
 }
 
-/// Certificates of the issuer's name, those whose key identifier fits first.
+/// Certificates with the issuer's name; the ones with a matching key identifier come first.
 CertificateList ChainBuilder::namedAs(const X509Certificate& issued) const {
     const auto found = candidates_.find(asText(issued.issuer().canonical));
     if (found == candidates_.end()) return {};
@@ -131,7 +131,7 @@ CertificateList ChainBuilder::namedAs(const X509Certificate& issued) const {
     return issuers;
 }
 
-/// What was not checked does not verify.
+/// Returns false if the signature was not checked.
 bool ChainBuilder::verifies(const X509CertificateRef& issuer, const X509CertificateRef& issued) {
     const std::optional<bool> result = checks_.verifies(issuer, issued);
     if (!result) exhausted_ = true;

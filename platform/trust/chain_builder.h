@@ -1,12 +1,12 @@
-// From a leaf and candidates to chains (RFC 4158 tells the pitfalls).
+// Builds chains from a leaf and candidates (RFC 4158 describes the pitfalls).
 //
-// A chain goes from issuer to issuer, by name; among several candidates whose key verifies the signature,
-// those whose key identifier fits come first, then the anchors. Not left to X509_verify_cert: that one checks
-// dates, purposes and more on its own account, and a policy here is its options and nothing more.
+// A chain goes from issuer to issuer, by name. Among several candidates whose key verifies the signature, a
+// fitting key identifier comes first, then an anchor. X509_verify_cert is not used: it checks dates, purposes
+// and more on its own, but a policy here is only its options.
 //
-// The search is bounded. Certificates that share one name ask for a check of every pair, and for a chain for
-// every order that they can be put in. A search that ends at a bound has shown nothing about the leaf, and
-// says that of itself.
+// The search is bounded, because certificates that share one name would need a check of every pair and a
+// chain for every order. A search that ends at a bound has proved nothing about the leaf, and reports
+// that.
 #pragma once
 
 #include <functional>
@@ -23,26 +23,26 @@ namespace pinwell::trust {
 
 /// Chains in use have 2 to 4 certificates.
 inline constexpr std::size_t kMaximumChainLength = 16;
-inline constexpr std::size_t kMaximumChains = 64;  // shown for one leaf
+inline constexpr std::size_t kMaximumChains = 64;  // tried for one leaf
 
-/// Made for one list, under however many policies. The slowest check, of an RSA key of 8192 bits or a point
-/// of 512, takes about 3 ms.
+/// For one list, under any number of policies. The slowest check, of an RSA key of 8192 bits or a point of
+/// 512, takes about 3 ms.
 inline constexpr std::size_t kMaximumSignatureChecks = 256;
 
 enum class Anchoring {
     none,
-    user,      // the chain holds a certificate of user-trust/allow, and no platform anchor ends it
+    user,      // it has a certificate of user-trust/allow, and does not end at a platform anchor
     platform,  // it ends at an anchor that the policy admits
 };
 
 struct CandidateChain {
     CertificateList certificates;             // leaf first
-    std::optional<std::size_t> badSignature;  // the first whose signature the next one's key does not verify
-    std::optional<std::size_t> denied;        // the first that the user's distrust reaches
+    std::optional<std::size_t> badSignature;  // the first one not verified by the next one's key
+    std::optional<std::size_t> denied;        // the first that the user distrusts
     Anchoring anchoring = Anchoring::none;
 };
 
-/// Checks of signatures, each made once, up to a bound. Keeps the certificates alive.
+/// Caches checks of signatures, up to a bound. Keeps the certificates alive.
 class SignatureChecks {
   public:
     /// `nullopt` if the bound is reached.
@@ -55,14 +55,14 @@ class SignatureChecks {
 /// For one evaluation. The lists and `checks` must outlive it.
 class ChainBuilder {
   public:
-    /// `given` is leaf first and not empty; `platformAnchors` are those that the policy admits.
+    /// `given` is leaf first and not empty; `platformAnchors` are the ones that the policy admits.
     ChainBuilder(const CertificateList& given, const CertificateList& platformAnchors, const Anchors& anchors,
                  SignatureChecks& checks);
 
-    /// Shows chains, the likeliest first, until `visit` returns true or there is no other.
+    /// Passes chains to `visit`, the likeliest first, until it returns true or there are no more.
     void build(const std::function<bool(const CandidateChain&)>& visit);
 
-    /// Whether a bound ended the search, so that there may be chains that were not shown.
+    /// Whether a bound ended the search, so that other chains may exist.
     bool isExhausted() const noexcept { return exhausted_; }
 
   private:

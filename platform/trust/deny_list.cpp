@@ -11,7 +11,7 @@ struct DeniedParts {
     Data key;
 };
 
-/// Leaves out every check that is not needed to find the key.
+/// Skips every check that is not needed to find the key.
 std::optional<DeniedParts> findParts(ByteView der) {
     using der::Cursor;
     try {

@@ -1,4 +1,4 @@
-// What the user distrusts, and what that reaches.
+// The certificates that the user distrusts, and the effect of that.
 #pragma once
 
 #include <unordered_set>
@@ -10,9 +10,9 @@ namespace pinwell::trust {
 
 using CertificateList = std::vector<X509CertificateRef>;
 
-/// Distrust is of what a certificate says and of who holds its key, not of bytes. A signature can be written
-/// in more than one way: from (r, s) of ECDSA anyone makes (r, n - s), which verifies as well. A key can be
-/// certified again: later, by another authority, under another name or algorithm, in another form of its
+/// Distrust applies to a certificate's contents and to its key, not to its bytes. A signature has
+/// several encodings: from (r, s) of ECDSA anyone can make (r, n - s), which verifies as well. A key
+/// can be certified again: later, by another authority, with another name, algorithm or form of its
 /// point.
 class DenyList {
   public:
@@ -21,18 +21,18 @@ class DenyList {
 
     void add(const X509CertificateRef& certificate);
 
-    /// A certificate that X509Certificate::parse refuses may hold the key of one that it takes. False if not
-    /// even its signed part and its key can be found; nothing is added then.
+    /// Adds a certificate that X509Certificate::parse refuses, because it may contain the key of an accepted
+    /// one. Returns false, and adds nothing, if its signed part or its key cannot be found.
     bool addUnreadable(ByteView der);
 
-    /// Whether the certificate says the same as one on the list (tbsCertificate, RFC 5280, 4.1.1.1), or has
-    /// the same key.
+    /// Whether the certificate has the same contents as one on the list (tbsCertificate, RFC 5280, 4.1.1.1),
+    /// or the same key.
     bool reaches(const X509Certificate& certificate) const;
 
-    /// Those that can be read.
+    /// The readable ones.
     const CertificateList& certificates() const noexcept { return certificates_; }
 
-    /// How many there are, also of those that cannot be read.
+    /// The number of all, also of unreadable ones.
     std::size_t size() const noexcept { return size_; }
 
   private:

@@ -1,11 +1,11 @@
-// Reading DER tags and lengths (ITU-T X.690) without a schema.
+// Reads DER tags and lengths (ITU-T X.690) without a schema.
 //
 //   element = tag, length, contents
-//   tag     first byte: class (2 bits), constructed (1 bit), number (5 bits); number 31 says that the number
+//   tag     first byte: class (2 bits), constructed (1 bit), number (5 bits); 31 means that the number
 //           follows in base 128, most significant digit first, bit 8 set in all digits but the last
 //   length  below 128: one byte; else a byte 0x80 + n, then n bytes, big-endian
 //
-// Refused: what is cut short, numbers and lengths not in their shortest form, indefinite lengths.
+// Refused: truncated elements, numbers and lengths not in their shortest form, indefinite lengths.
 #pragma once
 
 #include <cstdint>
@@ -29,27 +29,27 @@ struct Tag {
 inline constexpr Tag kConstructedSequence{TagClass::universal, true, 16};
 inline constexpr Tag kInteger{TagClass::universal, false, 2};
 
-/// How deep the elements of a certificate may be nested. Ours and the web's stay below 12.
+/// Maximum nesting of the elements of a certificate. Real certificates stay below 12.
 inline constexpr unsigned kMaximumNesting = 32;
 
-/// One element at the front of a byte range.
+/// One element at the start of a byte range.
 struct Element {
     Tag tag;
     foundation::ByteView whole;  // tag, length and contents
     foundation::ByteView contents;
 };
 
-/// The tag at the front of `bytes` and its size in bytes; nothing when it is cut short, or its number is not
+/// The tag at the start of `bytes` and its size in bytes; `nullopt` if it is truncated, or its number is not
 /// minimal or does not fit 32 bits.
 std::optional<std::pair<Tag, std::size_t>> readTag(foundation::ByteView bytes);
 
-/// Tag and definite length at the front of `bytes`; nothing when either cannot be read, the length is
+/// Tag and definite length at the start of `bytes`; `nullopt` if either is unreadable, the length is
 /// indefinite or not minimally encoded, or the contents reach past the end. Never reads past the end.
 std::optional<Element> readElement(foundation::ByteView bytes);
 
-/// Whether the bytes are elements end to end, and so are the contents of every constructed one, not deeper
-/// than `depth` levels. A certificate that passes holds no indefinite length, which OpenSSL would let
-/// through.
+/// Whether the bytes are elements end to end, also inside every constructed element, with at most
+/// `depth` levels. So a certificate that passes has no indefinite length, which OpenSSL would
+/// accept.
 bool isNestedDefinite(foundation::ByteView bytes, unsigned depth = kMaximumNesting);
 
 }  // namespace pinwell::trust::der

@@ -20,7 +20,7 @@ constexpr std::uint8_t kArcDigit = 0x7F;
 constexpr unsigned kDigitBits = 7;
 constexpr std::uint8_t kTrue = 0xFF;
 
-/// A number of any size, in base 10^9, least significant first. Arcs have no bound of their own.
+/// A number of any size, in base 10^9, least significant first. Arcs have no maximum.
 class DecimalNumber {
   public:
     void shiftIn(std::uint8_t digit) {
@@ -89,7 +89,7 @@ std::string firstArcs(DecimalNumber number) {
     return "2." + number.text();
 }
 
-/// Decimal digits of a time's text, one field after the other.
+/// Reads the decimal digits of a time's text, field by field.
 class TimeText {
   public:
     explicit TimeText(ByteView text) : reader_(text) {}
@@ -137,7 +137,7 @@ Date readTimeText(ByteView text, bool hasCentury) {
 void checkInteger(ByteView contents) {
     if (contents.empty()) throw Malformed("an integer has no contents");
     if (contents.size() == 1) return;
-    // The first nine bits are not all alike (X.690, 8.3.2).
+    // The first nine bits must not all be equal (X.690, 8.3.2).
     const bool secondIsSet = (contents.subspan(1).front() & kSignBit) != std::byte{0};
     if (contents.front() == (secondIsSet ? std::byte{0xFF} : std::byte{0}))
         throw Malformed("an integer is not in the fewest bytes");

@@ -1,4 +1,4 @@
-// Reading the values of a DER structure whose schema is known (ITU-T X.690).
+// Reads the values of a DER structure with a known schema (ITU-T X.690).
 //
 //   BOOLEAN            01 01 vv               vv is 00 or FF (11.1)
 //   INTEGER            02 n  two's complement, in the fewest bytes (8.3.2)
@@ -7,8 +7,8 @@
 //   UTCTime            17 0D YYMMDDhhmmssZ    50 to 99 belong to 1950 to 1999 (RFC 5280, 4.1.2.5.1)
 //   GeneralizedTime    18 0F YYYYMMDDhhmmssZ  (RFC 5280, 4.1.2.5.2)
 //
-// One departure from DER: a BOOLEAN that has its default value may be written out, as a number of authorities
-// do. It changes no meaning.
+// One departure from DER: a BOOLEAN with its default value may be present, as some authorities write it. It
+// changes no meaning.
 #pragma once
 
 #include <optional>
@@ -22,8 +22,8 @@
 
 namespace pinwell::trust::der {
 
-/// Contents of a longer object identifier are refused. RFC 5280, appendix B, asks readers for 100 bytes of
-/// the dotted form, which is longer than the contents.
+/// Longer object identifiers are refused. RFC 5280, appendix B, requires readers to accept 100 bytes of the
+/// dotted form, which is longer than the contents.
 inline constexpr std::size_t kMaximumOidSize = 128;
 
 inline constexpr Tag kBoolean{TagClass::universal, false, 1};
@@ -39,20 +39,20 @@ constexpr Tag contextTag(std::uint32_t number, bool constructed) {
     return {TagClass::contextSpecific, constructed, number};
 }
 
-/// The bytes do not have the structure that was asked for. Parsers catch it at their public boundary.
+/// Thrown if the bytes do not have the expected structure. Parsers catch it at their public boundary.
 class Malformed : public std::runtime_error {
   public:
     explicit Malformed(const char* what) : std::runtime_error(what) {}
 };
 
-/// The contents of an INTEGER in two's complement; throws Malformed unless they are in the fewest bytes.
+/// The contents of an INTEGER in two's complement; throws Malformed unless they have the fewest bytes.
 void checkInteger(foundation::ByteView contents);
 
-/// The magnitude of an INTEGER's contents without leading zero bytes, empty for 0; throws Malformed for a
-/// negative number, and unless it is in the fewest bytes.
+/// The magnitude of an INTEGER's contents without leading zero bytes, empty for 0; throws Malformed if the
+/// number is negative, or not in the fewest bytes.
 foundation::ByteView naturalNumber(foundation::ByteView contents);
 
-/// The bytes of a BIT STRING's contents; throws Malformed unless the unused bits are there and zero.
+/// The bytes of a BIT STRING's contents; throws Malformed unless the unused bits are zero.
 foundation::ByteView bitString(foundation::ByteView contents);
 
 /// The bytes of a BIT STRING without unused bits; throws Malformed for any other.
@@ -61,10 +61,10 @@ foundation::ByteView wholeBytes(foundation::ByteView contents);
 /// The dotted form of an object identifier's contents; throws Malformed.
 std::string dottedOid(foundation::ByteView contents);
 
-/// Throws Malformed for any form but the two that this file's head names, and for a date that there is not.
+/// Throws Malformed for any form except the two at the top of this file, and for an invalid date.
 foundation::Date readTime(const Element& element);
 
-/// A forward cursor over elements end to end. It owns nothing. Every read throws Malformed, and then has not
+/// A forward cursor over elements end to end. It owns nothing. If a read throws Malformed, the cursor has not
 /// moved.
 class Cursor {
   public:

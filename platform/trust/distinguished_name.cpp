@@ -77,7 +77,7 @@ std::string readFixedWidth(ByteView contents, std::size_t width, std::uint32_t l
     return text;
 }
 
-/// The value in UTF-8; `nullopt` if it is of a type that is no text.
+/// The value in UTF-8; `nullopt` if its type is not a text.
 std::optional<std::string> readText(const Element& value) {
     if (value.tag.tagClass != der::TagClass::universal || value.tag.constructed) return std::nullopt;
     switch (value.tag.number) {
@@ -101,7 +101,7 @@ std::optional<std::string> readText(const Element& value) {
     }
 }
 
-/// Small letters, one space for several, none at the ends.
+/// Lower-case letters, single spaces, no spaces at the ends.
 std::string fold(const std::string& text) {
     std::string folded;
     for (const char c : text) {

@@ -20,10 +20,10 @@ bool isPositiveInteger(const der::Element& element) {
     foundation::ByteReader reader(element.contents);
     const std::uint8_t first = reader.u8("integer");
     if (first != 0) return (first & kSignBit) == 0;
-    return !reader.atEnd() && (reader.u8("integer") & kSignBit) != 0;  // else zero, or not the shortest form
+    return !reader.atEnd() && (reader.u8("integer") & kSignBit) != 0;  // or zero, or not the shortest form
 }
 
-/// The DER element at the front of the field; empty when the field is not as it should be.
+/// The DER element at the start of the field; empty if the field is malformed.
 ByteView signatureElement(ByteView field) {
     const std::optional<der::Element> sequence = der::readElement(field);
     if (!sequence || sequence->tag != der::kConstructedSequence) return {};

@@ -26,7 +26,7 @@ constexpr std::string_view kPurposesOid = "2.5.29.37";
 constexpr std::string_view kServerAuthenticationPurpose = "1.3.6.1.5.5.7.3.1";
 constexpr std::string_view kAnyPurpose = "2.5.29.37.0";
 
-/// The contents of the one SEQUENCE that fills the value.
+/// The contents of the SEQUENCE that fills the value.
 Cursor enterSequence(ByteView value) {
     Cursor outer(value);
     const Cursor inner = outer.enter(der::kConstructedSequence);
@@ -96,7 +96,7 @@ void readConstraints(ByteView value, CertificateExtensions& into) {
     into.nameConstraints = readNameConstraints(value);
 }
 
-/// Which policies a certificate was issued under restricts nobody who asks for none (RFC 5280, 4.2.1.4).
+/// A certificate's policies have no effect, because we require none (RFC 5280, 4.2.1.4).
 void readCertificatePolicies(ByteView value, CertificateExtensions&) {
     Cursor list = enterSequence(value);
     do {  // at least one

@@ -1,4 +1,4 @@
-// The extensions of a certificate that the checks ask about, read once (RFC 5280, 4.2), without a library.
+// The extensions of a certificate that the checks need, read once (RFC 5280, 4.2), without a library.
 //
 //   Extensions  SEQUENCE OF SEQUENCE { OBJECT IDENTIFIER, critical BOOLEAN DEFAULT FALSE, value OCTET STRING
 //   }
@@ -12,7 +12,7 @@
 //   2.5.29.14  key identifier        OCTET STRING
 //   2.5.29.35  the issuer's          SEQUENCE { [0] OCTET STRING OPTIONAL, [1] names, [2] serial number }
 //
-// An extension whose value is not exactly that is malformed, and so is one that occurs twice.
+// An extension with another value is malformed, and so is one that occurs twice.
 #pragma once
 
 #include <cstdint>
@@ -26,7 +26,7 @@
 
 namespace pinwell::trust {
 
-/// A certificate of more extensions is refused. Certificates in use have fewer than 20.
+/// A certificate with more extensions is refused. Real certificates have fewer than 20.
 inline constexpr std::size_t kMaximumExtensions = 256;
 
 struct BasicConstraints {
@@ -40,13 +40,13 @@ inline constexpr std::uint32_t kKeyUsageKeyEncipherment = 1U << 2U;
 inline constexpr std::uint32_t kKeyUsageKeyAgreement = 1U << 4U;
 inline constexpr std::uint32_t kKeyUsageCertificateSigning = 1U << 5U;
 
-/// What the extended key usage names; other purposes are not kept.
+/// The known purposes in the extended key usage; others are not kept.
 struct Purposes {
     bool serverAuthentication = false;  // 1.3.6.1.5.5.7.3.1
     bool any = false;                   // 2.5.29.37.0
 };
 
-/// An extension that is absent, and one that cannot be read, is no value here; the latter is also listed as
+/// A missing or unreadable extension has no value here; an unreadable one is also listed as
 /// malformed.
 struct CertificateExtensions {
     struct Entry {
@@ -55,12 +55,12 @@ struct CertificateExtensions {
     };
 
     std::vector<Entry> entries;
-    std::vector<std::string> malformed;  // OIDs of those that cannot be read, or occur more than once
+    std::vector<std::string> malformed;  // OIDs of unreadable or repeated extensions
 
     std::optional<BasicConstraints> basicConstraints;
     std::optional<std::uint32_t> keyUsage;           // a malformed one permits nothing
-    std::optional<Purposes> purposes;                // malformed ones name nothing
-    std::optional<NameConstraints> nameConstraints;  // malformed ones permit nothing
+    std::optional<Purposes> purposes;                // a malformed one names nothing
+    std::optional<NameConstraints> nameConstraints;  // a malformed one permits nothing
     std::optional<AlternativeNames> alternativeNames;
     std::optional<foundation::Data> subjectKeyIdentifier;
     std::optional<foundation::Data> authorityKeyIdentifier;
@@ -70,12 +70,12 @@ struct CertificateExtensions {
 
 inline constexpr std::string_view kNameConstraintsOid = "2.5.29.30";
 
-/// Whether the checks know what an extension of this OID says, so that it may be critical. Name constraints
-/// are known where they are applied.
+/// Whether the checks know the extension with this OID, so that it may be critical. Name constraints are
+/// known if they are applied.
 bool isUnderstoodExtension(std::string_view oid, bool appliesNameConstraints);
 
-/// `contents` are those of the SEQUENCE. Throws der::Malformed if it is none of extensions, holds none, or
-/// too many.
+/// `contents` are the contents of the SEQUENCE. Throws der::Malformed if it is not a list of extensions, is
+/// empty, or has too many.
 CertificateExtensions readExtensions(foundation::ByteView contents);
 
 }  // namespace pinwell::trust

@@ -27,7 +27,7 @@ struct GeneralName {
     foundation::ByteView contents;
 };
 
-/// Throws der::Malformed for a tag that there is not, and for text that is not of 7 bits.
+/// Throws der::Malformed for an unknown tag, and for text that is not 7-bit.
 GeneralName readGeneralName(const der::Element& element);
 
 }  // namespace pinwell::trust

@@ -22,7 +22,7 @@ std::optional<Data> parseAddress(int family, std::size_t size, const std::string
     return foundation::toData(foundation::ByteView(address).first(size));
 }
 
-/// Not the C library's, which asks the locale.
+/// Unlike the C library's function, independent of the locale.
 char lowered(char c) {
     return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
 }

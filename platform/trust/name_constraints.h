@@ -1,4 +1,4 @@
-// Name constraints: which names the certificates below an issuer may carry (RFC 5280, 4.2.1.10).
+// Name constraints: the names that certificates below an issuer may have (RFC 5280, 4.2.1.10).
 //
 //   NameConstraints  SEQUENCE { [0] permitted, [1] excluded }     at least one of them, each of at least one
 //   GeneralSubtree   SEQUENCE { GeneralName }                     minimum and maximum are not allowed
@@ -6,7 +6,7 @@
 //   DNS name         the name and all names below it; ".example" all below "example"; empty: every name
 //   IP address       8 or 32 bytes, an address and its mask, a number of ones and then zeros
 //
-// Any other form is not handled, and a certificate below such a constraint is refused.
+// Other forms are not supported: a certificate below such a constraint is refused.
 #pragma once
 
 #include <map>
@@ -42,21 +42,21 @@ struct NameConstraints {
 /// From the value of the extension. Throws der::Malformed.
 NameConstraints readNameConstraints(foundation::ByteView value);
 
-/// Comparisons of a name with a subtree that one evaluation makes. Real chains make fewer than 1,000; the
-/// certificates of one chain could ask for 10^9.
+/// Maximum comparisons of a name with a subtree in one evaluation. Real chains need fewer than 1,000; one
+/// malicious chain could need 10^9.
 inline constexpr std::size_t kMaximumNameComparisons = 1U << 20U;
 
 enum class NameJudgement { permitted, excluded, unhandled, tooMany };
 
-/// Applies constraints to names for one evaluation, within its bound. What it is given must outlive it.
+/// Applies constraints to names for one evaluation, within its bound. The arguments must outlive it.
 class NameConstraintCheck {
   public:
-    /// All names of a certificate: each is within a permitted subtree of its form where there are any, and
-    /// none within an excluded one. A wildcard stands for every name that it covers. A DNS name that is none
-    /// is excluded where its form is constrained.
+    /// Judges all names of a certificate. Each must be within a permitted subtree of its form, if there are
+    /// any, and not within an excluded one. A wildcard means every name that it covers. A malformed DNS name
+    /// is excluded if its form is constrained.
     NameJudgement judge(const NameConstraints& constraints, const AlternativeNames& names);
 
-    /// The host that is being contacted, a DNS name or an address; the same at every call.
+    /// Judges the contacted host, a DNS name or an address; the same at every call.
     NameJudgement judgeHost(const NameConstraints& constraints, std::string_view host);
 
   private:

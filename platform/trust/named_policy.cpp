@@ -21,7 +21,7 @@ using LibraryHandle = std::unique_ptr<void, LibraryCloser>;
 
 struct PolicyReleaser {
     void operator()(const ostrel_policy* object) const noexcept {
-        // The version says where `release` is.
+        // The version determines the place of `release`.
         if (object->version == OSTREL_POLICY_VERSION && object->release != nullptr) object->release(object);
     }
 };

@@ -1,4 +1,4 @@
-// What the .cpp files that speak to OpenSSL share, here and in codesign. Nothing of it belongs in a header.
+// Shared by the .cpp files that use OpenSSL, here and in codesign. Do not include it in a header.
 #pragma once
 
 #include <openssl/asn1.h>
@@ -15,8 +15,8 @@ namespace pinwell::trust {
 
 using foundation::Handle;
 
-/// Leaves OpenSSL's error queue of this thread as it was found: a TLS session of the same thread reads that
-/// queue too, and would take our refusals for its own.
+/// Restores this thread's OpenSSL error queue: a TLS session on the same thread reads that queue too, and
+/// would mistake our refusals for its own.
 class ErrorQueueGuard {
   public:
     ErrorQueueGuard() { ERR_set_mark(); }

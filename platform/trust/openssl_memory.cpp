@@ -21,7 +21,7 @@ void release(void* memory, const char*, int) {
     std::free(memory);
 }
 
-// Not by realloc(3), which leaves the old place as it is when it moves.
+// Without realloc(3), which does not wipe the old memory when it moves.
 void* reallocate(void* memory, std::size_t size, const char* file, int line) {
     void* const moved = size == 0 ? nullptr : std::malloc(size);
     if (memory == nullptr) return moved;

@@ -20,7 +20,7 @@ struct Marker {
     std::size_t end = 0;
 };
 
-/// The next marker at or behind `from`; `nullopt` if there is none. A marker is in one line.
+/// The next marker at or after `from`; `nullopt` if there is none. A marker is in one line.
 std::optional<Marker> findMarker(std::string_view text, std::size_t from) {
     while ((from = text.find(kDashes, from)) != std::string_view::npos) {
         const std::string_view rest = text.substr(from);
@@ -80,7 +80,7 @@ class BlockReader {
     }
 
     std::string_view text_;
-    std::size_t counted_ = 0;  // up to where the lines are counted
+    std::size_t counted_ = 0;  // lines are counted up to here
     std::size_t line_ = 1;
     std::vector<PemBlock> blocks_;
 };

@@ -4,8 +4,8 @@
 //   base64, with white space anywhere
 //   -----END LABEL-----
 //
-// Text outside blocks is passed over. A block goes on to the next marker: if that is not its own end, the
-// block is damaged and the next one is read all the same.
+// Text outside blocks is skipped. A block extends to the next marker. If that is not its own end, the block
+// is damaged; the next block is still read.
 #pragma once
 
 #include <optional>
@@ -26,7 +26,7 @@ struct PemBlock {
 /// In the order of the text. Time and memory are linear in its length.
 std::vector<PemBlock> readPemBlocks(std::string_view text);
 
-/// Whether the block's label says that it is a certificate: "CERTIFICATE", or one of its two older forms.
+/// Whether the block's label is "CERTIFICATE" or one of its two older forms.
 bool isCertificateBlock(const PemBlock& block);
 
 }  // namespace pinwell::trust

@@ -1,4 +1,4 @@
-// The service over a platform directory: where files become anchors.
+// The service over a platform directory: reads its files as anchors.
 #include "foundation/file_io.h"
 #include "foundation/format.h"
 #include "trust/anchors.h"
@@ -9,7 +9,7 @@ namespace {
 
 using LogError = std::function<void(std::string_view)>;
 
-/// Hands over the contents of each file that can be read.
+/// Passes on the contents of each readable file.
 void readFiles(const std::vector<std::string>& paths, std::size_t maximumSize, const LogError& logError,
                const std::function<void(const std::string& path, ByteView text)>& use) {
     for (const std::string& path : paths) {

@@ -11,7 +11,7 @@ namespace {
 
 using foundation::format;
 
-/// Collects what is wrong with one chain.
+/// Collects the faults of one chain.
 class Examination {
   public:
     Examination(const CandidateChain& chain, const Requirements& requirements, Date now,
@@ -104,7 +104,7 @@ class Examination {
         return names(requirements_.leafMarkers) || names(requirements_.intermediateMarkers);
     }
 
-    /// A kind of key that the policy has no minimum for is none that it admits.
+    /// The policy admits only key types for which it has a minimum.
     void checkKeySize(std::size_t i) {
         const auto& key = certificates_[i]->publicKey();
         if (!key) return fail(i, "the public key cannot be used");
@@ -131,8 +131,8 @@ class Examination {
         }
     }
 
-    /// The constraints of certificate i hold for the host and for every certificate below. One in between
-    /// that has issued itself is exempt (RFC 5280, 6.1.3 (b)).
+    /// The constraints of certificate i apply to the host and to every certificate below. A self-issued one
+    /// in between is exempt (RFC 5280, 6.1.3 (b)).
     void checkNames(std::size_t i) {
         const NameConstraints& constraints = *certificates_[i]->extensions().nameConstraints;
         if (requirements_.hostName && !isPermitted(i, names_.judgeHost(constraints, *requirements_.hostName)))
@@ -161,8 +161,8 @@ class Examination {
         return false;
     }
 
-    /// A CA is one whose basic constraints say so and whose key usage, where stated, permits it (RFC
-    /// 5280, 6.1.4).
+    /// In a CA, the basic constraints say so, and the key usage, if present, permits it (RFC 5280,
+    /// 6.1.4).
     void checkAuthority(std::size_t i) {
         const CertificateExtensions& extensions = certificates_[i]->extensions();
         if (!extensions.basicConstraints || !extensions.basicConstraints->isCertificateAuthority) {
@@ -192,8 +192,8 @@ class Examination {
         if (requirements_.serverAuthentication) checkLeafPurpose(leaf);
     }
 
-    /// The purpose must be named: a policy may require that (RFC 5280, 4.2.1.12), and "any purpose" names
-    /// none.
+    /// The purpose must be named: a policy may require that (RFC 5280, 4.2.1.12). "Any purpose" is not
+    /// sufficient.
     void checkLeafPurpose(const CertificateExtensions& leaf) {
         if (!leaf.purposes || !leaf.purposes->serverAuthentication)
             fail(0, "the certificate is not for server authentication");

@@ -54,7 +54,7 @@ SharedKey makeRsa(const SubjectKey& key) {
     return fromParameters("RSA", builder.get());
 }
 
-/// OpenSSL refuses a point that is not on the curve, also a compressed one that has no y.
+/// OpenSSL refuses a point that is not on the curve, also a compressed one without a valid y.
 SharedKey makeEllipticCurve(const SubjectKey& key) {
     const BuilderHandle builder(OSSL_PARAM_BLD_new());
     const std::string curve(key.curve);
@@ -95,7 +95,8 @@ bool choosePssPadding(EVP_PKEY_CTX* context, const PssParameters& pss) {
            EVP_PKEY_CTX_set_rsa_pss_saltlen(context, static_cast<int>(pss.saltLength)) == 1;
 }
 
-/// A key that states parameters verifies no signature of others, nor one of a shorter salt (RFC 4055, 3.3).
+/// A key with parameters only verifies signatures with the same ones, and with a salt that is not shorter
+/// (RFC 4055, 3.3).
 bool permits(const PssParameters& key, const PssParameters& signature) {
     return key.digest == signature.digest && key.maskDigest == signature.maskDigest &&
            key.saltLength <= signature.saltLength;

@@ -1,5 +1,5 @@
-// A public key that can verify, and the signatures of certificates that it verifies. OpenSSL computes; it is
-// given numbers, points and names that `readSubjectKey` has read, and no encoding of them to interpret.
+// A public key that can verify, and the signatures of certificates that it verifies. OpenSSL computes with
+// numbers, points and names that `readSubjectKey` has read; it never parses an encoding.
 #pragma once
 
 #include <memory>
@@ -14,7 +14,7 @@ struct evp_pkey_st;  // OpenSSL's EVP_PKEY
 
 namespace pinwell::trust {
 
-/// Immutable once it is made; any thread may use it.
+/// Immutable; any thread may use it.
 class X509PublicKey final : public PublicKey {
   public:
     /// Null if the key is `unusable`, or its point is not on its curve.
@@ -32,8 +32,8 @@ class X509PublicKey final : public PublicKey {
     /// OpenSSL's name; of an elliptic-curve key alone.
     std::string_view curve() const noexcept { return description_.curve; }
 
-    /// Whether the key verifies a certificate's signature. False for an algorithm that is unknown or not the
-    /// key's own, for ECDSA signatures that are not in strict DER, and for signatures of the wrong length.
+    /// Whether the key verifies a certificate's signature. False for an algorithm that is unknown or does not
+    /// fit the key, for ECDSA signatures that are not in strict DER, and for signatures of the wrong length.
     bool verifies(const SignatureAlgorithm& algorithm, ByteView message, ByteView signature) const;
 
   private:

@@ -12,7 +12,7 @@ namespace {
 using foundation::Result;
 using foundation::Value;
 
-/// Each reader answers whether the value was of the option's type.
+/// Each reader returns whether the value has the option's type.
 bool readSwitch(const Value& value, bool& into) {
     if (value.boolean() == nullptr) return false;
     into = *value.boolean();

@@ -1,4 +1,4 @@
-// A policy's options as typed values: the one place that knows which keys and types there are.
+// A policy's options as typed values: the only place that knows their keys and types.
 #pragma once
 
 #include <map>
@@ -13,7 +13,7 @@ namespace pinwell::trust {
 
 enum class AnchorSet { platform, platformAndCompatibility };
 
-/// What a policy asks. A member that is false, empty or nothing is not checked.
+/// The requirements of a policy. A member that is false, empty or `nullopt` is not checked.
 struct Requirements {
     bool criticalExtensions = false;
     bool idLinkage = false;
@@ -22,7 +22,7 @@ struct Requirements {
     bool validityDates = false;
     bool serverAuthentication = false;
     bool nameConstraints = false;
-    AnchorSet anchors = AnchorSet::platform;  // a chain must be anchored somewhere, whatever the list says
+    AnchorSet anchors = AnchorSet::platform;  // every chain must be anchored, with any list of options
     std::optional<std::uint64_t> chainLength;
     std::vector<std::string> intermediateMarkers;
     std::vector<std::string> leafMarkers;
@@ -30,8 +30,8 @@ struct Requirements {
     std::optional<std::string> hostName;
 };
 
-/// An option that is not known, or whose value is not of its type, is an error that names it: a policy that
-/// is not understood in full must not be passed by anything.
+/// An unknown option, or a value of another type, is an error that names it: nothing may pass a policy that
+/// is not fully understood.
 foundation::Result<Requirements> readRequirements(const Dictionary& options);
 
 }  // namespace pinwell::trust

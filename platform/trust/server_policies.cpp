@@ -7,7 +7,7 @@ namespace {
 constexpr std::int64_t kMinimumRsaBits = 2048;
 constexpr std::int64_t kMinimumEllipticCurveBits = 256;
 
-// Identifiers of our own, beside that of the ticket-signing policy.
+// Our own identifiers, next to the ticket-signing policy's.
 constexpr std::string_view kPinnedServerPolicyOid = "1.2.840.177245.100.1.27.1";
 constexpr std::string_view kCompatibilityServerPolicyOid = "1.2.840.177245.100.1.27.2";
 

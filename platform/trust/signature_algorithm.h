@@ -1,4 +1,4 @@
-// How a certificate is signed (RFC 5280, 4.1.1.2), read without a library.
+// The signature algorithm of a certificate (RFC 5280, 4.1.1.2), read without a library.
 //
 //   AlgorithmIdentifier  SEQUENCE { OBJECT IDENTIFIER, parameters ANY OPTIONAL }
 //
@@ -22,7 +22,7 @@ namespace pinwell::trust {
 
 inline constexpr std::string_view kPssOid = "1.2.840.113549.1.1.10";
 
-/// A digest under the name that OpenSSL fetches it by.
+/// A digest, by its name in OpenSSL.
 struct Digest {
     std::string_view name;
     bool isSound = false;  // false for SHA-1 and MD5
@@ -30,7 +30,7 @@ struct Digest {
     bool operator==(const Digest&) const = default;
 };
 
-/// No digest is longer than 64 bytes, and no salt in use is longer than its digest.
+/// No digest is longer than 64 bytes, and real salts are at most as long as their digest.
 inline constexpr std::size_t kMaximumPssSalt = 512;
 
 struct PssParameters {
@@ -44,15 +44,15 @@ struct SignatureAlgorithm {
 
     std::string oid;  // dotted
     Scheme scheme = Scheme::unknown;
-    Digest digest;                     // of ECDSA and RSA
-    std::optional<PssParameters> pss;  // of RSASSA-PSS
+    Digest digest;                     // for ECDSA and RSA
+    std::optional<PssParameters> pss;  // for RSASSA-PSS
 
-    /// Whether the signature rests on a digest that is not known to be sound.
+    /// Whether the signature uses a digest that is not known to be sound.
     bool isWeak() const;
 };
 
-/// `contents` are those of the SEQUENCE. Parameters that do not belong to the algorithm make it unknown.
-/// Throws der::Malformed if it has no identifier or bytes are left over.
+/// `contents` are the contents of the SEQUENCE. Parameters of another algorithm make it unknown. Throws
+/// der::Malformed if it has no identifier or bytes are left over.
 SignatureAlgorithm readSignatureAlgorithm(foundation::ByteView contents);
 
 /// From the contents of the SEQUENCE of RSASSA-PSS's parameters. Throws der::Malformed.

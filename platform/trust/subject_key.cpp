@@ -72,7 +72,7 @@ Data identityOf(char kind, ByteView first, ByteView second = {}) {
         .take();
 }
 
-/// Of modulus and exponent, however the integers are written.
+/// The identity of modulus and exponent, in any encoding of the integers.
 std::optional<Data> rsaIdentity(ByteView key) {
     const std::optional<Element> sequence = der::readElement(key);
     if (!sequence || sequence->tag != der::kConstructedSequence || sequence->whole.size() != key.size())
@@ -85,7 +85,7 @@ std::optional<Data> rsaIdentity(ByteView key) {
     return identityOf('R', withoutLeadingZeros(modulus->contents), withoutLeadingZeros(exponent->contents));
 }
 
-/// Of x and of the lowest bit of y, which every form of a point has.
+/// The identity of x and the lowest bit of y, which every form of a point has.
 std::optional<Data> pointIdentity(ByteView key) {
     if (key.size() < 2) return std::nullopt;
     ByteReader reader(key);
@@ -129,7 +129,8 @@ void readRsa(ByteView bytes, SubjectKey& key) {
     const ByteView exponent = numbers.naturalNumber();
     numbers.expectEnd();
     if (bitLength(modulus) > kMaximumRsaBits || bitLength(exponent) > kMaximumRsaExponentBits) return;
-    // An even number is no product of odd primes, and no exponent that has an inverse; 1 would sign anything.
+    // An even modulus is not a product of odd primes, and an even exponent has no inverse. With exponent 1
+    // anything would verify.
     if (!isOdd(modulus) || !isOdd(exponent) || bitLength(exponent) < 2) return;
     if (bitLength(modulus) <= bitLength(exponent)) return;
     key.kind = SubjectKey::Kind::rsa;

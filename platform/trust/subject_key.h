@@ -1,4 +1,4 @@
-// A subject's public key as its certificate writes it down (RFC 5280, 4.1.2.7), read without a library.
+// A subject's public key in its certificate (RFC 5280, 4.1.2.7), read without a library.
 //
 //   SubjectPublicKeyInfo  SEQUENCE { algorithm SEQUENCE { OBJECT IDENTIFIER, parameters ANY OPTIONAL },
 //                                    key BIT STRING }
@@ -9,9 +9,9 @@
 //   1.2.840.10045.2.1     EC     a curve's identifier  04 x y, or 02 or 03 and x                 5480, 2
 //   1.3.101.112, .113     EdDSA  absent                32 bytes; 57 bytes                        8410, 4
 //
-// Any other algorithm, curve or form is a key that cannot be used: DSA and Diffie-Hellman, curves described
-// by their numbers (such a curve can be chosen to fit a private key of one's own), binary curves, and hybrid
-// points (06, 07), which RFC 5480 forbids.
+// Every other algorithm, curve or form is unusable: DSA and Diffie-Hellman, curves given by their numbers (an
+// attacker can choose such a curve to fit a private key), binary curves, and hybrid points (06, 07), which
+// RFC 5480 forbids.
 #pragma once
 
 #include <cstdint>
@@ -24,11 +24,11 @@
 
 namespace pinwell::trust {
 
-/// The largest modulus, also of the signers of code. Verifying takes time with the cube of it, at most: 8192
-/// bits take a third of a millisecond, 131072 bytes would take hours.
+/// The largest modulus, also for signers of code. Verification time grows at most with its cube: 8192 bits
+/// take a third of a millisecond, 131072 bytes would take hours.
 inline constexpr std::size_t kMaximumRsaBits = 8192;
 
-/// The largest exponent. The usual one has 17 bits; verifying takes time in proportion to its bits.
+/// The largest exponent. The usual one has 17 bits; verification time is in proportion to its bits.
 inline constexpr std::size_t kMaximumRsaExponentBits = 64;
 
 struct SubjectKey {
@@ -39,26 +39,26 @@ struct SubjectKey {
     std::string algorithm;   // dotted
     std::string_view curve;  // OpenSSL's name; of an elliptic-curve key alone
 
-    foundation::Data modulus;   // of an RSA key, big-endian, the first byte not zero
+    foundation::Data modulus;   // for RSA, big-endian, the first byte not zero
     foundation::Data exponent;  // the same
-    foundation::Data point;     // of the other kinds, as written
+    foundation::Data point;     // for other kinds, as written
 
-    /// What every signature of this key must be; of a PSS key that has parameters alone.
+    /// The required parameters of every signature; only for a PSS key with parameters.
     std::optional<PssParameters> pssOnly;
     bool isPss = false;
 
-    /// Written by an algorithm that this reader does not know, or in a form that it does not take, a key has
-    /// the same identity all the same: that of its modulus and exponent, or of its point (x, and whether y is
-    /// odd), whatever algorithm, parameters and form of the point stand around them.
+    /// The identity of the key: its modulus and exponent, or its point (x, and whether y is odd). It is the
+    /// same for every algorithm, parameters and form of the point, even for ones that this reader does not
+    /// accept.
     foundation::Data identity;
 };
 
-/// `contents` are those of the outer SEQUENCE. Throws der::Malformed if they do not have the structure above;
-/// a key that cannot be used is `unusable`.
+/// `contents` are the contents of the outer SEQUENCE. Throws der::Malformed if they do not have the structure
+/// above; a key that cannot be used is `unusable`.
 SubjectKey readSubjectKey(foundation::ByteView contents);
 
-/// The identity alone, from the contents of a SEQUENCE that need not be well-formed but for its two elements.
-/// `nullopt` if they are not there.
+/// Only the identity, from the contents of a SEQUENCE of which only the two elements need to be well-formed.
+/// `nullopt` if they are missing.
 std::optional<foundation::Data> readKeyIdentity(foundation::ByteView contents);
 
 }  // namespace pinwell::trust

@@ -1,8 +1,8 @@
 // The certificate-trust service: certificates, policies that are lists of options, trust objects and their
 // verdict.
 //
-// A policy is its options and nothing more: what the list does not name is not checked. All calls block and
-// may be made from any thread; one trust object serves one thread at a time.
+// A policy is only its options: a rule outside the list is not checked. All calls block and may be made from
+// any thread; one trust object serves one thread at a time.
 #pragma once
 
 #include <cstdint>
@@ -37,7 +37,7 @@ inline constexpr Status kSignatureError = -67688;  // a signature did not verify
 /// Verdict numbers of an evaluation.
 enum class Verdict : std::uint32_t {
     invalid = 0,             // not evaluated
-    proceed = 1,             // anchored only through certificates that the user chose to trust
+    proceed = 1,             // anchored only through certificates that the user trusts
     deny = 3,                // the user distrusts a certificate of the chain
     unspecified = 4,         // trusted by the platform's own anchors, without a user setting
     recoverableFailure = 5,  // a policy check failed
@@ -52,7 +52,7 @@ class Certificate {
 
     virtual const Data& der() const = 0;
 
-    /// What a person knows it by: the subject's common name, else its last named part, else its key
+    /// Its name for people: the subject's common name, otherwise its last named part, otherwise its key
     /// identifier.
     virtual std::string subjectSummary() const = 0;
 };
@@ -65,15 +65,15 @@ class PublicKey {
 };
 using PublicKeyRef = std::shared_ptr<const PublicKey>;
 
-/// Option keys. The value's type is behind each; `true` switches a check on. An option that is not among
-/// these, or whose value is of another type, makes the verdict otherError. Without an anchor option the
-/// anchors are those of kPlatformAnchor. Certificates are checked root included; of a list of marker OIDs all
-/// must be there.
+/// Option keys. The value's type follows each; `true` enables a check. An unknown option, or a
+/// value of another type, makes the verdict otherError. Without an anchor option the anchors are
+/// those of kPlatformAnchor. The root is checked too; every OID in a list of markers must be
+/// present.
 ///
-/// kServerAuthentication: the leaf's purposes name it; an issuer that has purposes has it or "any" among
-/// them, the anchor included; and the leaf's key usage, where it is stated, allows TLS. kNameConstraints:
-/// those of every issuer, the anchor included, critical or not, hold for the host and for all names of the
-/// certificates below; without the option, critical name constraints are not known.
+/// kServerAuthentication: the leaf's purposes name it. If an issuer or the anchor has purposes, they name it
+/// or "any". The leaf's key usage, if present, allows TLS. kNameConstraints: the constraints of every issuer
+/// and of the anchor, critical or not, apply to the host and to all names of the certificates below. Without
+/// the option, critical name constraints count as unknown.
 namespace option {
 inline constexpr std::string_view kCriticalExtensions = "CriticalExtensions";  // true
 inline constexpr std::string_view kIdLinkage = "IdLinkage";                    // true
@@ -82,8 +82,8 @@ inline constexpr std::string_view kNonEmptySubject = "NonEmptySubject";        /
 inline constexpr std::string_view kPlatformAnchor =
     "PlatformAnchor";  // dictionary of sub-options, may be empty
 inline constexpr std::string_view kCompatibilityAnchor =
-    "CompatibilityAnchor";                                       // the same, compat-roots/ besides
-inline constexpr std::string_view kChainLength = "ChainLength";  // number, leaf and root counted
+    "CompatibilityAnchor";                                       // the same, and compat-roots/
+inline constexpr std::string_view kChainLength = "ChainLength";  // number, with leaf and root
 inline constexpr std::string_view kIntermediateMarkerOid =
     "IntermediateMarkerOid";                                         // dotted OID, or a list of them
 inline constexpr std::string_view kLeafMarkerOid = "LeafMarkerOid";  // dotted OID, or a list of them
@@ -98,7 +98,7 @@ inline constexpr std::string_view kNameConstraints = "NameConstraints";         
 inline constexpr std::string_view kKeyTypeRSA = "RSA";
 inline constexpr std::string_view kKeyTypeEllipticCurve = "EC";
 
-/// A certificate policy. The three fields are the whole of it.
+/// A certificate policy. It has only these three fields.
 struct Policy {
     std::string oid;
     std::optional<std::string> name;
@@ -109,7 +109,7 @@ using PolicyRef = std::shared_ptr<const Policy>;
 /// Extension that marks the TLS leaf of the pinned policy.
 inline constexpr std::string_view kPinnedServerMarkerOid = "1.2.840.177245.100.6.27.2";
 
-/// The two TLS server policies, bound to a host; nothing for an empty host.
+/// The two TLS server policies, bound to a host; null for an empty host.
 PolicyRef createPinnedServerPolicy(std::string_view host);
 PolicyRef createCompatibilityServerPolicy(std::string_view host);
 
@@ -122,23 +122,23 @@ class Trust {
   public:
     virtual ~Trust() = default;
 
-    /// Replaces the policies by this one and forgets an earlier verdict.
+    /// Replaces the policies by this one and drops an earlier verdict.
     virtual Status setPolicy(PolicyRef policy) = 0;
 
     /// Judges the list. A status other than success means that no judgement was possible.
     virtual Status evaluate(Verdict& verdict) = 0;
 
-    /// One dictionary per certificate of the chain, leaf first: a title, and an error where it is at fault.
+    /// One dictionary for each certificate of the chain, leaf first: a title, and an error if it is faulty.
     virtual Array copyProperties() const = 0;
 
-    /// One line that names what failed and the certificate at fault; nothing after success.
+    /// One line that names the failure and the faulty certificate; `nullopt` after success.
     virtual std::optional<std::string> copyFailureDescription() const = 0;
 
-    /// Of the evaluated leaf; null when there is none.
+    /// The key of the evaluated leaf; null if there is none.
     virtual PublicKeyRef copyPublicKey() const = 0;
 };
 
-/// A policy library that could be opened, and what it says under a name.
+/// The result of looking up a policy by name in the policy library.
 enum class NamedPolicyOutcome {
     unavailable,  // no library, or it does not know the name
     refused,      // the constructor returned nothing
@@ -155,21 +155,21 @@ class TrustService {
     /// A policy from the platform security library's argument-less constructor of that name.
     virtual NamedPolicyOutcome createNamedPolicy(const std::string& constructorName, PolicyRef& policy) = 0;
 
-    /// Leaf first. Certificates behind the leaf are candidates for its chain in any order; those that are of
-    /// no use are passed over. kParameterError for an empty list, one of more than 64, and certificates of
+    /// Leaf first. The certificates after the leaf are candidates for its chain, in any order; useless ones
+    /// are skipped. Returns kParameterError for an empty list, one of more than 64, and certificates of
     /// another service.
     virtual Status createTrust(std::vector<CertificateRef> certificates, PolicyRef policy,
                                std::shared_ptr<Trust>& trust) = 0;
 
     /// The error is kSignatureError of the OS-status domain. ECDSA in X9.62 form over SHA-256 of `message`.
-    /// The signature is the DER element at the front of `signature`; whatever stands behind it must be zero.
-    /// Nothing when it verifies.
+    /// The signature is the DER element at the start of `signature`; all bytes after it must be zero. Returns
+    /// `nullopt` if it verifies.
     virtual std::optional<Error> verifySignature(const PublicKey& key, ByteView message,
                                                  ByteView signature) = 0;
 };
 
 /// The service over the platform directory's anchors, read once on first need. `now` is the evaluation time.
-/// A PEM file that cannot be read counts for nothing; `logError` is told once, with one line that names it.
+/// An unreadable PEM file is ignored; `logError` is called once, with one line that names it.
 std::unique_ptr<TrustService> makeTrustService(foundation::PlatformDirectory directory,
                                                std::function<void(std::string_view)> logError,
                                                std::function<Date()> now = Date::now);

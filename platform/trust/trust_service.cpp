@@ -14,7 +14,7 @@
 namespace pinwell::trust {
 namespace {
 
-/// What evaluations share: the anchors, read on first need, and the clock.
+/// Shared by evaluations: the anchors, read on first use, and the clock.
 class Environment {
   public:
     Environment(std::function<Anchors()> load, std::function<Date()> now)
@@ -45,7 +45,7 @@ class Environment {
     CertificateList platformAndCompatibility_;
 };
 
-/// A chain and what was found wrong with it.
+/// A chain and its faults.
 struct Judgement {
     CandidateChain chain;
     std::vector<Failure> failures;
@@ -57,8 +57,8 @@ struct Judgement {
 
     bool isTrusted() const { return failures.empty(); }
 
-    /// Which of two chains for the same leaf to go by. Of the bad ones, one that the user distrusts says most
-    /// about why the leaf is refused, then one that ends where it should.
+    /// The rank of a chain among several for the same leaf. Among bad chains, a distrusted one explains the
+    /// refusal best, then one that ends at an anchor.
     int rank() const {
         switch (verdict()) {
             case Verdict::unspecified:
@@ -73,7 +73,7 @@ struct Judgement {
     }
 };
 
-/// What a search that ended at a bound has shown: nothing but that, unless the leaf itself is distrusted.
+/// The result of a search that ended at a bound: only that fact, unless the leaf itself is distrusted.
 Judgement exhausted(const CertificateList& given, const Anchors& anchors) {
     Judgement judgement{{{given.front()}, std::nullopt, std::nullopt, Anchoring::none}, {}};
     if (anchors.denied.reaches(*given.front())) {
@@ -163,13 +163,13 @@ class ChainTrust final : public Trust {
     std::shared_ptr<Environment> environment_;
     CertificateList certificates_;
     PolicyRef policy_;
-    SignatureChecks checks_;  // of all policies together
+    SignatureChecks checks_;  // for all policies together
     std::optional<Judgement> judgement_;
     std::optional<std::string> policyError_;
 };
 
-/// The certificates parsed last. A run meets the same few again and again (the ticket that is stapled and the
-/// one that is downloaded, both policies of a server), and parsing one costs more than verifying its
+/// The certificates parsed last. A run parses the same few repeatedly (of the stapled and the
+/// downloaded ticket, and for both policies of a server), and parsing one costs more than verifying its
 /// signature.
 class RecentCertificates {
   public:

@@ -1,4 +1,4 @@
-// The trust service over anchors from anywhere: what a platform directory is read into, and what tests bring.
+// The trust service over anchors from any source: a platform directory, or a test.
 #pragma once
 
 #include "trust/anchors.h"
@@ -6,13 +6,13 @@
 
 namespace pinwell::trust {
 
-/// The list of a trust object may not be longer.
+/// Maximum length of a trust object's list.
 inline constexpr std::size_t kMaximumCertificates = 64;
 
-/// Whose policies createNamedPolicy looks up; found by the dynamic loader's ordinary rules.
+/// The library of createNamedPolicy; found by the dynamic loader's ordinary rules.
 inline constexpr const char* kSecurityLibrary = "libostrelsecurity.so.1";
 
-/// `loadAnchors` is called once, on first need, whatever the number of threads.
+/// `loadAnchors` is called once, on first use, with any number of threads.
 std::unique_ptr<TrustService> makeTrustService(std::function<Anchors()> loadAnchors,
                                                std::function<Date()> now,
                                                std::string securityLibrary = kSecurityLibrary);

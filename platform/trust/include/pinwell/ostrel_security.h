@@ -2,20 +2,20 @@
  * The interface between Pinwell and a platform security library, libostrelsecurity.so.1.
  *
  * Such a library exports, under the name of each policy that it knows, one function of the type
- * ostrel_policy_constructor. Pinwell opens the library, calls the function, copies what it answers and closes the
- * library again. Without the library, or without the function in it, Pinwell uses the policy that it has built in;
- * a function that is there and answers no usable policy makes the check fail.
+ * ostrel_policy_constructor. Pinwell opens the library, calls the function, copies its result and closes the
+ * library again. Without the library, or without the function in it, Pinwell uses its built-in policy. If the
+ * function exists but returns no usable policy, the check fails.
  *
  * Name of the ticket-signing policy's constructor: SecPolicyCreateOstrelQuillonPlusTicket
  *
- * Ownership: the object belongs to Pinwell until it calls `release` with it, once, before the library is closed.
- * Everything that the object points to must stay as it is until then. With a null `release` the object is the
- * library's own (static, say). Strings are UTF-8 and end with a zero byte.
+ * Ownership: the object belongs to Pinwell until it calls `release` with it, once, before the library is
+ * closed. Everything that the object points to must not change until then. With a null `release` the object
+ * stays the library's (for example static). Strings are UTF-8 and end with a zero byte.
  *
- * Not usable, so that the check fails: another version; a null `oid`, key, list or list entry where one is due; more
- * than OSTREL_MAXIMUM_OPTIONS options or OSTREL_MAXIMUM_ENTRIES entries; a string longer than
- * OSTREL_MAXIMUM_STRING bytes; an unknown type; the same key twice. A policy with an option key that is not listed
- * here, or whose value is not of the type listed, is taken but trusts nothing.
+ * Not usable, so that the check fails: another version; a null `oid`, key, list or list entry where one is
+ * required; more than OSTREL_MAXIMUM_OPTIONS options or OSTREL_MAXIMUM_ENTRIES entries; a string longer than
+ * OSTREL_MAXIMUM_STRING bytes; an unknown type; the same key twice. A policy with an unknown option key, or a
+ * value of another type, is accepted but trusts nothing.
  *
  *   Key                      Type                            Meaning
  *   CriticalExtensions       boolean                         no malformed extension, no critical one unknown
@@ -85,7 +85,7 @@ typedef struct ostrel_policy {
     void (*release)(const struct ostrel_policy *policy); /* may be null */
 } ostrel_policy;
 
-/* Answers a policy, or null when it refuses. May be called from any thread. */
+/* Returns a policy, or null if it refuses. May be called from any thread. */
 typedef const ostrel_policy *(*ostrel_policy_constructor)(void);
 
 #ifdef __cplusplus
