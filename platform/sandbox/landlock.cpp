@@ -18,8 +18,8 @@ namespace {
 
 using foundation::FileDescriptor;
 
-// The kernel's numbers (include/uapi/linux/landlock.h). Spelled out because the headers of Linux 6.1, which
-// Debian 12 builds with, know the first version only in part.
+// The kernel's numbers (include/uapi/linux/landlock.h). Defined here because the headers of Linux 6.1, on
+// Debian 12, lack some of them.
 enum FileRight : std::uint64_t {
     execute = 1U << 0U,
     writeFile = 1U << 1U,
@@ -64,7 +64,7 @@ constexpr int kPathRule = 1;
 constexpr std::uint64_t kReadRights = readFile | readDirectory;
 constexpr std::uint64_t kWriteRights = kReadRights | writeFile | truncateFile | removeDirectory | removeFile |
                                        makeDirectory | makeRegular | refer;
-// Those that a rule on something else than a directory may give.
+// Rights that a rule on anything but a directory may give.
 constexpr std::uint64_t kRightsToOneFile = execute | writeFile | readFile | truncateFile | deviceControl;
 
 std::uint64_t knownFileRights(int version) {
@@ -84,7 +84,7 @@ std::string lastReason() {
     return std::generic_category().message(errno);
 }
 
-// A rule holds for one inode. Network file systems of this sort make up a new one whenever they like.
+// A rule is for one inode. Network file systems of this type may give a file a new inode at any time.
 bool keepsInodes(int place) {
     constexpr std::uint32_t kPlan9 = 0x01021997;  // linux/magic.h
     struct statfs fileSystem {};
@@ -94,14 +94,14 @@ bool keepsInodes(int place) {
 std::optional<std::string> addRule(int ruleset, const FileRule& rule, std::uint64_t known) {
     const FileDescriptor place(open(rule.path.c_str(), O_PATH | O_CLOEXEC));
     struct stat status {};
-    if (!place || fstat(place.get(), &status) != 0) return std::nullopt;  // nothing there to give rights to
+    if (!place || fstat(place.get(), &status) != 0) return std::nullopt;  // it does not exist
     if (!keepsInodes(place.get())) return rule.path + ": the file system (9P) does not keep it";
     PathRule added;
     added.rights = (rule.access == Access::write ? kWriteRights : kReadRights) & known;
     if (!S_ISDIR(status.st_mode)) added.rights &= kRightsToOneFile;
     added.parent = place.get();
     if (syscall(SYS_landlock_add_rule, ruleset, kPathRule, &added, 0U) == 0) return std::nullopt;
-    if (errno == EBADFD) return std::nullopt;  // a pipe or a socket, which may be read in any case
+    if (errno == EBADFD) return std::nullopt;  // a pipe or a socket: always readable
     return rule.path + ": " + lastReason();
 }
 
@@ -115,7 +115,7 @@ int landlockVersion() {
 std::optional<std::string> restrictFiles(const FileRules& files, Network network) {
     const int version = landlockVersion();
     if (version == 0) return lastReason();
-    // The first version forbids every rename from one directory to another, which is how a file is replaced.
+    // The first version forbids every rename between directories, but replacing a file needs one.
     const bool writes = std::any_of(files.begin(), files.end(),
                                     [](const FileRule& rule) { return rule.access == Access::write; });
     if (writes && version < kVersionWithRenames) return "this kernel's version of it forbids renaming files";

@@ -1,4 +1,4 @@
-// Landlock: rights to files and TCP, given up for good. For this folder only.
+// Landlock: gives up rights to files and TCP permanently. For this folder only.
 #pragma once
 
 #include <optional>
@@ -8,11 +8,11 @@
 
 namespace pinwell::sandbox {
 
-/// Version of the kernel's Landlock; 0 without. Sets errno then.
+/// Version of the kernel's Landlock. Returns 0, with errno set, without it.
 int landlockVersion();
 
 /// Gives up all rights to files that `files` does not name, and to TCP as `network` says, as far as the
-/// kernel's version goes. Returns why nothing was given up; `nullopt` if it was. The process must have
+/// kernel's version supports it. Returns `nullopt` on success, otherwise the reason. The process must have
 /// no_new_privs set.
 std::optional<std::string> restrictFiles(const FileRules& files, Network network);
 

@@ -1,4 +1,4 @@
-// The files that the libraries of a process look for while it runs.
+// The files that the libraries of a process open while it runs.
 
 #include <dlfcn.h>
 #include <glob.h>
@@ -28,7 +28,7 @@ namespace {
 namespace fs = std::filesystem;
 using foundation::secureEnvironment;
 
-// Far above what any system has: a few lines.
+// Far more than any real system's few lines.
 constexpr std::size_t kMaximumConfiguration = std::size_t{64} * 1024;
 constexpr std::string_view kBlank = " \t";
 
@@ -36,7 +36,8 @@ void addReadable(FileRules& rules, std::string path) {
     if (path.starts_with('/')) rules.push_back({std::move(path), Access::read});
 }
 
-// A list of directories as the environment has it: colons between them (LD_LIBRARY_PATH also has semicolons).
+// A list of directories in an environment variable, with colons between them (LD_LIBRARY_PATH also allows
+// semicolons).
 void addList(FileRules& rules, std::string_view list, std::string_view suffix = {}) {
     while (true) {
         const std::size_t end = list.find_first_of(":;");
@@ -50,7 +51,7 @@ void addVariable(FileRules& rules, const char* name) {
     if (const auto list = secureEnvironment(name)) addList(rules, *list);
 }
 
-// ldconfig(8): a directory a line, or `include PATTERN`; # begins a comment.
+// ldconfig(8): one directory on each line, or `include PATTERN`; # begins a comment.
 void addLoaderConfiguration(FileRules& rules, const std::string& path, int depth);
 
 void addIncluded(FileRules& rules, const std::string& pattern, int depth) {
@@ -104,7 +105,7 @@ void addLinks(FileRules& rules, const fs::path& directory, int depth) {
     }
 }
 
-// Where the loader looks, in its order: also what is linked into the program itself.
+// The loader's directories, in its order, with the program's own.
 void addLoaderDirectories(FileRules& rules) {
     void* const program = dlopen(nullptr, RTLD_LAZY);
     Dl_serinfo size{};

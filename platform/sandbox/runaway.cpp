@@ -15,10 +15,10 @@ namespace {
 
 constexpr std::uint64_t kReadingSeconds = 60;
 constexpr std::uint64_t kBytesPerSecond = std::uint64_t{1024} * 1024;
-constexpr std::uint64_t kSanitizedFactor = 20;  // how much slower an instrumented build may be
+constexpr std::uint64_t kSanitizedFactor = 20;  // an instrumented build may be this much slower
 constexpr rlim_t kMaximumStack = rlim_t{8} * 1024 * 1024;
 
-// A handler is given nothing but its signal: what it says has to be where it can find it, until the very end.
+// A handler gets only its signal: its message must be in a global variable until the very end.
 const RunawayEnd* ending = nullptr;
 
 [[noreturn]] void endWith(const std::string& line) {
@@ -35,9 +35,9 @@ void onProcessorTime(int) {
 void onFault(int number, siginfo_t* information, void*) {
     if (information->si_code > 0 && foundation::StackGuard::isBeyondStack(information->si_addr))
         endWith(ending->stack);
-    // Some other fault: it happens again when this returns, and the process crashes as it would have.
+    // Another fault: it repeats after this returns, and the process crashes as without us.
     std::signal(number, SIG_DFL);
-    if (information->si_code <= 0) raise(number);  // sent by a process, so that it does not happen again
+    if (information->si_code <= 0) raise(number);  // sent by a process, so it does not repeat by itself
 }
 
 template <class Resource>

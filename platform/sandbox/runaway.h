@@ -1,7 +1,7 @@
-// The end of a process that uses far more processor time, or stack, than what it reads can be worth: one line
-// and an exit status, instead of a build that hangs, or a crash.
+// Ends a process that uses far more processor time or stack than its input can need: with one line and an
+// exit status, instead of a hanging build or a crash.
 //
-// Every reader bounds its work, so this is for what a bound has missed, in a library for instance.
+// Every reader bounds its work, so this is for cases that the bounds miss, for example in a library.
 #pragma once
 
 #include <atomic>
@@ -10,26 +10,26 @@
 
 namespace pinwell::sandbox {
 
-/// Processor time, in seconds, that a run may take over input of that many bytes: 60 s for reading (what
-/// takes longest of the inputs that we know takes 2 s), and a second for every MiB. A processor without any
-/// instruction for it hashes more than ten times as fast.
+/// The limit of processor time, in seconds, for input of that many bytes: 60 s for reading (the slowest known
+/// input takes 2 s), and a second for every MiB. Even a processor without hash instructions hashes ten times
+/// as fast.
 std::uint64_t processorSecondsFor(std::uint64_t bytes);
 
 struct RunawayEnd {
-    /// Where the line goes; -1 for nowhere.
+    /// The descriptor for the line; -1 for none.
     int descriptor = 1;
     /// Lines without newlines.
     std::string processorTime;
     std::string stack;
-    /// Read when it happens; must outlive the process.
+    /// Read at the end; must live as long as the process.
     const std::atomic<std::int32_t>* exitStatus = nullptr;
 };
 
-/// From now on this process ends so, once, when it has used `processorSeconds` in all, or when a thread with
-/// a foundation::StackGuard goes beyond its stack, of which the main thread's has at most 8 MiB. A lower
-/// limit that the caller has set stays. Processor time that runs out while a file is written waits for the
-/// end of that (foundation::SignalDeferral). To be called before there is a second thread, and before the
-/// main thread's guard. Other crashes stay as they are; in builds with sanitizers, so do stacks.
+/// From now on this process ends in this way if it has used `processorSeconds` in all, or if a thread with a
+/// foundation::StackGuard exceeds its stack. The main thread's stack has at most 8 MiB. A lower limit that
+/// the caller has set stays. If the time runs out during a write, the end waits for the write
+/// (foundation::SignalDeferral). Call it before there is a second thread, and before the main thread's guard.
+/// Other crashes are not changed; in builds with sanitizers, stacks are not limited either.
 void limitRunaways(std::uint64_t processorSeconds, RunawayEnd end);
 
 }  // namespace pinwell::sandbox

@@ -16,11 +16,11 @@ namespace pinwell::sandbox {
 
 std::vector<std::string> confine(const Confinement& confinement) {
     std::vector<std::string> missing;
-    // Both facilities ask for it of a process that is not the superuser's.
+    // Both facilities require it unless the process is the superuser's.
     if (prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) != 0) missing.emplace_back("no_new_privs is not in force");
     FileRules rules = confinement.files;
 #ifdef PINWELL_COUNTS_DIRECTORY
-    rules.push_back({PINWELL_COUNTS_DIRECTORY, Access::write});  // of a build that counts what runs
+    rules.push_back({PINWELL_COUNTS_DIRECTORY, Access::write});  // for a build that counts executed lines
 #endif
     const auto files = restrictFiles(rules, confinement.network);
     if (files) missing.push_back("Landlock is not in force: " + *files);

@@ -27,7 +27,7 @@ using foundation::kSanitized;
 
 using Names = std::span<const char* const>;
 
-// What no program of ours does once it runs, and what an intruder would reach for.
+// Calls that no program of ours makes at this point, but an intruder would.
 constexpr std::array kForbidden{
     // other processes
     "process_vm_readv", "process_vm_writev", "process_madvise", "process_mrelease", "kcmp", "pidfd_open",
@@ -49,15 +49,15 @@ constexpr std::array kForbidden{
     // a second way into most calls, past this filter
     "io_uring_setup", "io_uring_enter", "io_uring_register"};
 
-// Besides, where no leak checker needs them.
+// Also forbidden, unless a leak checker needs them.
 constexpr std::array kForbiddenUnlessSanitized{"execve", "execveat", "fork", "vfork", "ptrace"};
 constexpr std::array kNeededBySanitizers{"execve", "fork",        "vfork", "ptrace",
                                          "clone",  "wait4",       "pipe",  "process_vm_readv",
                                          "kill",   "personality", "unlink"};
 
-// All that reading takes: files, memory, threads, time, and ending.
+// Calls for reading: files, memory, threads, time, and exiting.
 constexpr std::array kReading{
-    // files; opening them has rules of its own, and so only reports that were opened before can be written
+    // files; opening has its own rules, so only reports opened before can be written
     "close", "close_range", "read", "readv", "pread64", "preadv", "preadv2", "write", "writev", "ftruncate",
     "ftruncate64", "lseek", "_llseek", "fstat", "fstat64", "stat", "stat64", "lstat", "lstat64", "newfstatat",
     "fstatat64", "statx", "statfs", "statfs64", "fstatfs", "fstatfs64", "access", "faccessat", "faccessat2",
@@ -76,14 +76,14 @@ constexpr std::array kReading{
     // time
     "clock_gettime", "clock_gettime64", "clock_getres", "clock_getres_time64", "clock_nanosleep",
     "clock_nanosleep_time64", "nanosleep", "gettimeofday", "time", "times",
-    // who and where
+    // identity and place
     "getpid", "getppid", "getpgrp", "getuid", "getuid32", "geteuid", "geteuid32", "getgid", "getgid32",
     "getegid", "getegid32", "getgroups", "getgroups32", "getresuid", "getresgid", "getrlimit", "ugetrlimit",
     "setrlimit", "getrusage", "uname", "sysinfo", "getrandom",
-    // of some processors
+    // for some processors
     "riscv_hwprobe", "riscv_flush_icache", "cacheflush", "set_tls"};
 
-constexpr std::uint64_t kLowWord = 0xFFFFFFFF;  // what the kernel looks at of an argument that is an int
+constexpr std::uint64_t kLowWord = 0xFFFFFFFF;  // the bits of an int argument that the kernel reads
 constexpr std::uint64_t kOpenToWrite =
     O_ACCMODE | O_CREAT | O_TRUNC | (static_cast<unsigned>(O_TMPFILE) & ~static_cast<unsigned>(O_DIRECTORY));
 constexpr std::array<std::uint64_t, 2> kTerminalInput{TIOCSTI, TIOCLINUX};
@@ -109,7 +109,7 @@ class Rules {
     void add(std::uint32_t action, const char* name, std::initializer_list<scmp_arg_cmp> conditions = {}) {
         if (failure_ != 0) return;
         const int number = seccomp_syscall_resolve_name(name);
-        if (number == __NR_SCMP_ERROR) return;  // newer than the library, so the default action meets it
+        if (number == __NR_SCMP_ERROR) return;  // newer than the library, so the default action applies
         const int done = seccomp_rule_add_array(filter_.get(), action, number,
                                                 static_cast<unsigned>(conditions.size()), conditions.begin());
         // EDOM: not on this processor. EACCES: the default action does that anyway.
@@ -120,10 +120,10 @@ class Rules {
         for (const char* const name : names) add(action, name);
     }
 
-    // Returns an errno value; 0 when the filter is in force.
+    // Returns an errno value; 0 if the filter is in force.
     int load() {
         if (failure_ != 0) return failure_;
-        // Calls of another architecture, of 32-bit programs for instance, have other numbers.
+        // Calls of another architecture, for example of 32-bit programs, have other numbers.
         seccomp_attr_set(filter_.get(), SCMP_FLTATR_ACT_BADARCH, kUnknown);
         seccomp_attr_set(filter_.get(), SCMP_FLTATR_CTL_NNP, 0);       // set already
         seccomp_attr_set(filter_.get(), SCMP_FLTATR_CTL_OPTIMIZE, 2);  // a search tree, quicker at every call
@@ -146,8 +146,8 @@ constexpr unsigned kCloneFlags = 1;
 constexpr unsigned kCloneFlags = 0;
 #endif
 
-// Threads are started by clone(2); a new process is what lacks the flag. The flags of clone3(2) lie in
-// memory, where no filter sees them; without it the C library takes clone(2).
+// clone(2) starts threads; without the thread flag it makes a new process. The flags of clone3(2) are in
+// memory, where no filter sees them; without clone3(2) the C library uses clone(2).
 void allowThreadsOnly(Rules& rules, Calls calls) {
     rules.add(kUnknown, "clone3");
     if (kSanitized) return;
@@ -158,16 +158,16 @@ void allowThreadsOnly(Rules& rules, Calls calls) {
     }
 }
 
-// Whether sockets have one call for all that is done with them, as on s390x and i386. Its arguments lie in
-// memory, so that a rule on them would meet every socket.
+// Whether one system call does all socket operations, as on s390x and i386. Its arguments are in memory, so a
+// rule would affect every socket.
 bool hasOneCallForSockets() {
     return seccomp_syscall_resolve_name("socketcall") >= 0;
 }
 
 void restrictSockets(Rules& rules, Network network) {
     if (hasOneCallForSockets()) return;
-    // Every family but Unix (1), and with a network IPv4 (2), IPv6 (10) and netlink (16), and of netlink all
-    // but routing (0).
+    // Every family except Unix (1), and with a network except IPv4 (2), IPv6 (10) and netlink (16); of
+    // netlink, everything except routing (0).
     const bool hasNetwork = network != Network::none;
     for (std::uint64_t family = 0; family < AF_NETLINK; ++family) {
         const bool isOfTheNetwork = family == AF_INET || family == AF_INET6;
@@ -195,7 +195,7 @@ Rules serviceRules(Network network) {
     for (const char* const call : {"kill", "tgkill", "rt_sigqueueinfo", "rt_tgsigqueueinfo"})
         if (!kSanitized) rules.add(kRefuse, call, {is(0, SCMP_CMP_NE, self)});
     rules.add(kRefuse, "prlimit64", {is(0, SCMP_CMP_NE, 0)});
-    // Words put into the caller's terminal are commands to its shell.
+    // Text inserted into the caller's terminal becomes commands for its shell.
     for (const std::uint64_t request : kTerminalInput)
         rules.add(kRefuse, "ioctl", {is(1, SCMP_CMP_MASKED_EQ, kLowWord, request)});
     return rules;
@@ -211,7 +211,7 @@ Rules readingRules(FilesAre files) {
 #endif
     rules.add(SCMP_ACT_ALLOW, "open", {is(1, SCMP_CMP_MASKED_EQ, kOpenToWrite, 0)});
     rules.add(SCMP_ACT_ALLOW, "openat", {is(2, SCMP_CMP_MASKED_EQ, kOpenToWrite, 0)});
-    // Its flags lie in memory too.
+    // Its flags are in memory too.
     if (files == FilesAre::restricted) rules.add(SCMP_ACT_ALLOW, "openat2");
     for (const std::uint64_t request : kTerminalQuestions)
         rules.add(SCMP_ACT_ALLOW, "ioctl", {is(1, SCMP_CMP_MASKED_EQ, kLowWord, request)});
@@ -230,7 +230,7 @@ std::optional<std::string> restrictCalls(Calls calls, Network network, FilesAre 
     Rules rules = calls == Calls::reading ? readingRules(files) : serviceRules(network);
     const int failure = rules.load();
     if (failure == 0) return std::nullopt;
-    // What the library says of every refusal of the kernel's.
+    // The library's code for every refusal of the kernel.
     if (failure == ECANCELED) return "the kernel refuses it";
     return std::generic_category().message(failure);
 }

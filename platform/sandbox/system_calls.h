@@ -1,4 +1,4 @@
-// seccomp: system calls given up for good. For this folder only.
+// seccomp: gives up system calls permanently. For this folder only.
 #pragma once
 
 #include <optional>
@@ -8,11 +8,11 @@
 
 namespace pinwell::sandbox {
 
-/// Whether Landlock already keeps files from being opened for writing.
+/// Whether Landlock already prevents opening files for writing.
 enum class FilesAre { open, restricted };
 
-/// Gives up the calls that `calls` does not allow. Returns why nothing was given up; `nullopt` if they were.
-/// The process must have no_new_privs set.
+/// Gives up the calls that `calls` does not allow. Returns `nullopt` on success, otherwise the reason. The
+/// process must have no_new_privs set.
 std::optional<std::string> restrictCalls(Calls calls, Network network, FilesAre files);
 
 }  // namespace pinwell::sandbox
