@@ -34,7 +34,7 @@ class Domain final : public UserDefaults {
     }
 
   private:
-    // The user's choice, when it is of the asked kind, else the registered default.
+    // The user's value if it has the right type, otherwise the registered default.
     template <class T>
     const T* find(std::string_view key, const T* (Value::*asKind)() const noexcept) const {
         for (const Dictionary* values : {&chosen_, &registered_}) {
@@ -49,9 +49,9 @@ class Domain final : public UserDefaults {
     Dictionary registered_;
 };
 
-// Where the domains are; nothing when the environment does not tell, or is not to be trusted.
+// The directory of the domains; `nullopt` if the environment does not name it, or is not trusted.
 std::optional<std::string> configurationDirectory() {
-    // A relative path in this variable is to be ignored (XDG Base Directory Specification).
+    // A relative path in this variable must be ignored (XDG Base Directory Specification).
     if (auto directory = foundation::secureEnvironment("XDG_CONFIG_HOME");
         directory && directory->starts_with('/'))
         return directory;

@@ -1,4 +1,4 @@
-// User defaults: one JSON object a domain, $XDG_CONFIG_HOME (or $HOME/.config)/DOMAIN.json.
+// User defaults: one JSON object for each domain, $XDG_CONFIG_HOME (or $HOME/.config)/DOMAIN.json.
 #pragma once
 
 #include <memory>
@@ -13,15 +13,15 @@ namespace pinwell::defaults {
 /// Longest domain file that is read.
 inline constexpr std::size_t kMaximumDomainFile = 1024 * 1024;
 
-/// One opened domain. A value that is missing or of another type is answered from the registered defaults,
-/// value by value; so is every value when the file is missing or malformed. Not for use by two threads at
+/// One opened domain. A value that is missing or of another type comes from the registered
+/// defaults; so does every value if the file is missing or malformed. Not for use by two threads at
 /// once.
 class UserDefaults {
   public:
     virtual ~UserDefaults() = default;
     virtual void registerDefaults(foundation::Dictionary defaults) = 0;
-    virtual std::string stringForKey(std::string_view key) = 0;  // empty when neither has it
-    virtual bool boolForKey(std::string_view key) = 0;           // false when neither has it
+    virtual std::string stringForKey(std::string_view key) = 0;  // empty if neither has it
+    virtual bool boolForKey(std::string_view key) = 0;           // false if neither has it
 };
 
 class UserDefaultsService {
@@ -30,7 +30,7 @@ class UserDefaultsService {
     virtual std::unique_ptr<UserDefaults> openDomain(std::string_view domain) = 0;
 };
 
-/// The file of that domain; `nullopt` when the environment does not tell where it is, or is not to be
+/// The file of that domain; `nullopt` if the environment does not name its directory, or is not
 /// trusted.
 std::optional<std::string> domainFile(std::string_view domain);
 

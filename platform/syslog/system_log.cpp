@@ -30,8 +30,8 @@ class HostLog final : public SystemLog {
     }
 
     void error(std::string_view text) override {
-        // Not every caller's text has gone through format(); escaping what is escaped changes nothing. What
-        // is cut first need not be escaped to the end.
+        // Not every caller's text comes from format(); escaping twice changes nothing. The text is cut first,
+        // so that no long text is escaped.
         const std::string entry = cut(foundation::escapeForTerminal(text.substr(0, kLongestEntry + 1)));
         const std::lock_guard lock(mutex_);
         open(0);

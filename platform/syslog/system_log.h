@@ -11,12 +11,13 @@ namespace pinwell::syslog {
 /// Longest entry in bytes; a longer one is cut and ends in "...".
 inline constexpr std::size_t kLongestEntry = 2048;
 
-/// Where error entries go. May be used from any thread.
+/// Receives error entries. May be used from any thread.
 class SystemLog {
   public:
     virtual ~SystemLog() = default;
 
-    /// One entry at error level, word for word: a percent sign means itself. Control characters are escaped.
+    /// Logs one entry at error level, word for word: a percent sign has no meaning. Control characters are
+    /// escaped.
     virtual void error(std::string_view text) = 0;
 
     /// Connects now rather than with the first entry: for a process that may not connect later.

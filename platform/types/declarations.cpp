@@ -8,7 +8,7 @@ namespace {
 constexpr std::string_view kBundle = "com.ostrel.bundle";
 constexpr std::string_view kPackage = "com.ostrel.package";
 
-// Parents that have no line of their own have no parents.
+// A parent without its own line has no parents.
 constexpr std::array kDeclarations{
     Declaration{"com.ostrel.application-bundle", {kApplication, kBundle, kPackage}},
     Declaration{"com.ostrel.generic-bundle", {kBundle}},

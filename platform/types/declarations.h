@@ -1,4 +1,4 @@
-// The types that this platform declares, and which are kinds of which.
+// The types that this platform declares, and their parents.
 #pragma once
 
 #include <array>
@@ -19,13 +19,13 @@ inline constexpr std::string_view kDiskImage = "com.ostrel.disk-image";
 
 struct Declaration {
     std::string_view identifier;
-    std::array<std::string_view, 3> parents;  // empty ones are none
+    std::array<std::string_view, 3> parents;  // unused ones are empty
 };
 
-/// Null for an identifier that is not declared.
+/// Returns null for an undeclared identifier.
 const Declaration* declarationOf(std::string_view identifier) noexcept;
 
-/// The identifier declared for an extension, in lower case, on that kind of item; empty when none is.
+/// The identifier declared for an extension, in lower case, on that kind of item; empty if there is none.
 std::string_view declaredIdentifier(std::string_view extension, ItemKind kind) noexcept;
 
 }  // namespace pinwell::types

@@ -16,7 +16,7 @@ namespace {
 constexpr std::size_t kLongestExtension = 255;  // of any file name on the host
 constexpr std::size_t kLargestDescription = 256 * 1024;
 
-// The library's functions, found when an extension is first met that this platform does not declare itself.
+// The library's functions, found at the first extension that this platform does not declare itself.
 struct Gio {
     Gio() {
         foundation::LazyLibrary library("libgio-2.0.so.0");
@@ -58,7 +58,7 @@ bool isLetterOrDigit(char c) {
     return (c >= '0' && c <= '9') || (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z');
 }
 
-// "text/plain": two parts that can stand in a path.
+// "text/plain": two parts that are safe in a path.
 bool isWellFormed(std::string_view type) {
     const auto isPart = [](std::string_view part) {
         return !part.empty() && part.front() != '.' && std::all_of(part.begin(), part.end(), [](char c) {
@@ -100,7 +100,7 @@ std::string untranslatedComment(foundation::ByteView document) {
     return parsed ? reader.comment : std::string();
 }
 
-// Where the database's parts are, the user's own first.
+// The directories of the database, the user's own first.
 std::vector<std::string> dataDirectories() {
     std::vector<std::string> directories{gio().userDataDirectory()};
     for (const char* const* directory = gio().systemDataDirectories(); *directory != nullptr; ++directory)
@@ -115,7 +115,7 @@ std::optional<std::string> mimeTypeForExtension(std::string_view extension) {
                               extension.find('/') == std::string_view::npos &&
                               extension.size() <= kLongestExtension;
     if (!canBeInAName || !gio().isThere) return std::nullopt;
-    // No contents are handed over, and none are looked for: the library opens nothing by this name.
+    // No contents are passed, and the library opens no file of this name.
     const std::string name = "name." + std::string(extension);
     const std::unique_ptr<char, FreeText> type(gio().contentTypeGuess(name.c_str(), nullptr, 0, nullptr));
     const bool isKnown = type != nullptr && !gio().contentTypeIsUnknown(type.get()) &&

@@ -1,5 +1,5 @@
-// The freedesktop.org shared MIME database, asked by extension. It is loaded by the first question. May be
-// used from any thread. No file but the database's own is opened.
+// The freedesktop.org shared MIME database, by extension. Loaded on first use. May be used from any thread.
+// Opens only the database's own files.
 #pragma once
 
 #include <optional>
@@ -8,11 +8,11 @@
 
 namespace pinwell::types {
 
-/// The type, as "text/plain", of files whose name ends in a dot and `extension`; nothing when the database
-/// has none.
+/// The type, such as "text/plain", of files whose name ends in a dot and `extension`; `nullopt` if the
+/// database has none.
 std::optional<std::string> mimeTypeForExtension(std::string_view extension);
 
-/// The database's untranslated comment on a type, "plain text document"; nothing when there is none.
+/// The database's untranslated comment on a type, "plain text document"; `nullopt` if there is none.
 ///
 /// Read from the database directly: the library's own look-up translates by the environment's language, and
 /// the environment cannot be changed safely in a process with threads.

@@ -33,7 +33,7 @@ std::string identifierForMIMEType(std::string mimeType, ItemKind kind) {
     return std::string(kind == ItemKind::directory ? kPublicDirectoryPrefix : kPublicPrefix) + mimeType;
 }
 
-// What an identifier made by identifierForMIMEType is a kind of; nothing for any other.
+// The parent of an identifier made by identifierForMIMEType; `nullopt` for any other.
 std::optional<std::string_view> parentOfMIMEIdentifier(std::string_view identifier) {
     if (declarationOf(identifier) != nullptr) return std::nullopt;
     const auto hasTwoParts = [&](std::string_view prefix) {

@@ -1,6 +1,6 @@
-// Uniform type identifiers: what kind of thing a path is, and which kinds are kinds of which.
+// Uniform type identifiers: the type of an item, and the parents of each type.
 //
-// Stateless but for the shared MIME database, which is loaded on first need. May be used from any thread.
+// Stateless except for the shared MIME database, which is loaded on first use. May be used from any thread.
 #pragma once
 
 #include <memory>
@@ -11,7 +11,7 @@ namespace pinwell::types {
 
 enum class ItemKind { regularFile, directory, symbolicLink, other };
 
-/// What is known of an item when its type is asked for.
+/// The known facts about an item whose type is needed.
 struct Item {
     std::string_view name;  // last path component
     ItemKind kind = ItemKind::other;
@@ -25,22 +25,22 @@ class TypeService {
     /// The identifier, from the name's extension (case-insensitive) and the kind.
     virtual std::string typeIdentifier(const Item& item) = 0;
 
-    /// A short lower-case English noun, whatever the locale.
+    /// A short lower-case English noun, in every locale.
     virtual std::string localizedDescription(const Item& item) = 0;
 
     /// Equal, or declared to conform directly or through parents.
     virtual bool conforms(std::string_view identifier, std::string_view to) = 0;
 
-    /// Made up for an undeclared type.
+    /// Whether the identifier was generated for an undeclared type.
     virtual bool isDynamic(std::string_view identifier) = 0;
 };
 
-/// Whether the freedesktop.org shared MIME database is asked about what this platform does not declare. Its
-/// library is opened for that, and reads files that the environment names.
+/// Whether to use the freedesktop.org shared MIME database for undeclared types. That opens its library,
+/// which reads files that the environment names.
 enum class MimeDatabase { asked, leftAlone };
 
-/// The declarations of this platform, and the database behind them. Without it an undeclared type is dynamic,
-/// which makes no difference to what kind of artefact something is.
+/// A service over this platform's declarations, and the database after them. Without the database an
+/// undeclared type is dynamic, which does not affect the kind of an artefact.
 std::unique_ptr<TypeService> makeTypeService(MimeDatabase database = MimeDatabase::asked);
 
 }  // namespace pinwell::types

@@ -30,8 +30,8 @@ auto uninterrupted(Call call) {
     }
 }
 
-// A number at the start of a property's text, as strtoull(3) finds it, whatever follows; but with no digits,
-// a minus sign or too many digits there is none.
+// The number at the start of a property's text, as in strtoull(3), with any text after it. `nullopt` without
+// digits, with a minus sign or with too many digits.
 std::optional<std::uint64_t> leadingNumber(const std::optional<std::string>& text) {
     if (!text) return std::nullopt;
     std::string_view rest = *text;
@@ -57,8 +57,8 @@ std::unique_ptr<Archive> Archive::open(const std::string& path) {
 }
 
 bool Archive::openFile(const std::string& path) {
-    // Opening alone can set a device to work, so the look comes first; the second one is for what has taken
-    // the file's place since, which O_NONBLOCK keeps from blocking us.
+    // Opening alone can start a device, so the first check comes before it. The second check is for an item
+    // that has replaced the file since; O_NONBLOCK prevents blocking on it.
     struct stat status {};
     if (uninterrupted([&] { return stat(path.c_str(), &status); }) != 0 || !S_ISREG(status.st_mode))
         return false;
@@ -69,7 +69,7 @@ bool Archive::openFile(const std::string& path) {
     return true;
 }
 
-// All of the bytes, or nothing.
+// All of the bytes, or `nullopt`.
 std::optional<Data> Archive::read(std::uint64_t offset, std::size_t length) const {
     if (offset > fileSize_ || length > fileSize_ - offset) return std::nullopt;
     Data bytes(length);
@@ -109,20 +109,20 @@ bool Archive::readTable(const Header& header) {
     return true;
 }
 
-// Whether the table speaks of the header's checksum, and of no other one.
+// Whether the table describes the header's checksum, and no other.
 bool Archive::isChecksumDescribed(DigestAlgorithm algorithm) const {
     const bool isSigned = !table_.signatures.empty();
     if (algorithm == DigestAlgorithm::none && isSigned) return false;
     const bool hasElement = table_.properties.find("checksum") != table_.properties.end();
     if (!hasElement && algorithm == DigestAlgorithm::none) return true;
     if (!table_.checksumStyle || digestAlgorithmNamed(*table_.checksumStyle) != algorithm) return false;
-    // A signature would sign bytes of which nobody has said where they are.
+    // Otherwise a signature would sign bytes without a stated place.
     const bool isPlaced = table_.properties.find(kOffsetPath) != table_.properties.end() &&
                           table_.properties.find(kSizePath) != table_.properties.end();
     return isPlaced || !isSigned;
 }
 
-// Without an offset the checksum is at the start of the heap, without a size it is as long as it must be.
+// Without an offset the checksum is at the start of the heap; without a size it has the digest's length.
 bool Archive::isChecksumStored() const {
     const auto number = [&](std::string_view path, std::uint64_t otherwise) {
         const auto found = table_.properties.find(path);

@@ -1,4 +1,4 @@
-// An open archive: its file, and what its table of contents says. For this folder only.
+// An open archive: its file, and its table of contents. For this folder only.
 #pragma once
 
 #include <cstdint>
@@ -16,15 +16,15 @@ namespace pinwell::xar {
 
 class Archive {
   public:
-    /// The archive at `path`, its table of contents compared with the checksum in the heap. Returns null if
-    /// they differ or one cannot be read, and for an archive with signatures but without an algorithm for the
-    /// checksum: what those sign would be anything. Throws std::bad_alloc.
+    /// Opens the archive at `path`, and compares its table of contents with the checksum in the heap. Returns
+    /// null if they differ or one cannot be read. Returns null too for an archive with signatures but without
+    /// a checksum algorithm, because its signatures would cover nothing. Throws std::bad_alloc.
     static std::unique_ptr<Archive> open(const std::string& path);
 
     const TableOfContents& table() const noexcept { return table_; }
 
-    /// The checksum of the table of contents: computed, and found in the heap, when the archive was opened.
-    /// Empty for an archive without an algorithm, which has no signatures.
+    /// The checksum of the table of contents, computed and compared with the heap by open(). Empty for an
+    /// archive without an algorithm, which has no signatures.
     const foundation::Data& checksum() const noexcept { return checksum_; }
 
   private:

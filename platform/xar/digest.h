@@ -1,4 +1,4 @@
-// The digests that a table of contents can be checked with. For this folder only.
+// The digests for the checksum of a table of contents. For this folder only.
 #pragma once
 
 #include <memory>
@@ -11,8 +11,8 @@ namespace pinwell::xar {
 
 enum class DigestAlgorithm { none, md5, sha1, sha224, sha256, sha384, sha512 };
 
-/// By its name in lower case, "none" included. Returns `nullopt` for any other spelling: who compares names
-/// without regard to case, and who does not, would not read the same archives.
+/// The algorithm by its name in lower case, also "none". Returns `nullopt` for any other spelling: otherwise
+/// readers that compare case would differ from readers that do not.
 std::optional<DigestAlgorithm> digestAlgorithmNamed(std::string_view name);
 
 /// In bytes; 0 for none.
@@ -21,10 +21,10 @@ std::size_t digestSize(DigestAlgorithm algorithm);
 /// No digest is longer.
 inline constexpr std::size_t kLongestDigest = 64;
 
-/// A digest over bytes that come in pieces.
+/// A digest over several pieces of bytes.
 class Digest {
   public:
-    /// Throws std::bad_alloc when the algorithm cannot be had here (for want of memory, or by local policy).
+    /// Throws std::bad_alloc if the algorithm is not available (no memory, or local policy).
     explicit Digest(DigestAlgorithm algorithm);
     ~Digest();
     Digest(const Digest&) = delete;
@@ -32,7 +32,7 @@ class Digest {
 
     void update(foundation::ByteView bytes);
 
-    /// Once, and last. Empty for none.
+    /// Call it once, and last. Empty for `none`.
     foundation::Data finish();
 
   private:

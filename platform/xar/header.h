@@ -3,17 +3,17 @@
 // | Offset    | Size | Field                                                     |
 // |-----------|------|-----------------------------------------------------------|
 // | 0         | 4    | "xar!"                                                    |
-// | 4         | 2    | size of the header, at least 28; what it adds is skipped  |
-// | 6         | 2    | version, not looked at                                    |
+// | 4         | 2    | size of the header, at least 28; more bytes are skipped   |
+// | 6         | 2    | version, ignored                                          |
 // | 8         | 8    | compressed length of the table of contents                |
-// | 16        | 8    | its uncompressed length, not looked at                    |
+// | 16        | 8    | its uncompressed length, ignored                          |
 // | 24        | 4    | checksum algorithm: 0 none, 1 SHA-1, 2 MD5, 3 by name     |
-// | 28        |      | the algorithm's name, zero-padded, when it is 3           |
+// | 28        |      | the algorithm's name, zero-padded, if the number is 3     |
 // | size      |      | the table of contents, a zlib stream                      |
-// | behind it |      | the heap, which the table's offsets count from            |
+// | after it  |      | the heap; the table's offsets count from its start        |
 //
 // Big-endian. A header with a name is at least 32 bytes and a multiple of 4. In headers of exactly 28 bytes,
-// which hold no name, 3 stands for SHA-256 and 4 for SHA-512.
+// which have no name, 3 means SHA-256 and 4 means SHA-512.
 #pragma once
 
 #include <cstdint>
@@ -27,7 +27,7 @@ namespace pinwell::xar {
 /// The length of the fields that every header has.
 inline constexpr std::size_t kFixedHeaderSize = 28;
 
-/// As much of a header as is ever looked at: the fixed fields and a name.
+/// Longest part of a header that is read: the fixed fields and a name.
 inline constexpr std::size_t kLongestHeaderRead = kFixedHeaderSize + 64;
 
 struct Header {
@@ -36,8 +36,8 @@ struct Header {
     DigestAlgorithm algorithm = DigestAlgorithm::none;
 };
 
-/// The header that `bytes`, the file's first kLongestHeaderRead at most, begin with. Returns `nullopt` if
-/// they begin with none.
+/// The header at the start of `bytes`, which are at most the file's first kLongestHeaderRead bytes. Returns
+/// `nullopt` if there is none.
 std::optional<Header> parseHeader(foundation::ByteView bytes);
 
 }  // namespace pinwell::xar

@@ -1,4 +1,4 @@
-// A zlib stream (RFC 1950) in, its contents out, piece by piece. For this folder only.
+// Unpacks a zlib stream (RFC 1950), piece by piece. For this folder only.
 #pragma once
 
 #include <cstdint>
@@ -11,20 +11,20 @@ namespace pinwell::xar {
 
 class Inflater {
   public:
-    /// Takes a piece of the contents, valid during the call; false ends it all.
+    /// Takes a piece of the contents, valid during the call; returns false to stop.
     using Sink = std::function<bool(foundation::ByteView)>;
 
-    /// `limit` is the most that the contents may come to, in bytes. Throws std::bad_alloc.
+    /// `limit` is the maximum length of the contents, in bytes. Throws std::bad_alloc.
     Inflater(std::uint64_t limit, Sink sink);
     ~Inflater();
     Inflater(const Inflater&) = delete;
     Inflater& operator=(const Inflater&) = delete;
 
-    /// False when the stream is malformed, its contents pass the limit, or the sink is done with it: then no
-    /// more must be fed. What follows the stream's end is passed over.
+    /// Returns false if the stream is malformed, its contents exceed the limit, or the sink stops it; then
+    /// feed no more. Bytes after the stream's end are skipped.
     bool feed(foundation::ByteView compressed);
 
-    /// Whether the stream came to its end, with its own checksum right.
+    /// Whether the stream has ended, with a correct checksum.
     bool complete() const noexcept { return complete_; }
 
   private:

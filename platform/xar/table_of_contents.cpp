@@ -22,12 +22,12 @@ bool decidesTheChecksum(std::string_view path) {
     return path == "checksum" || path == "checksum/offset" || path == "checksum/size";
 }
 
-// The second came later, for what older readers should not stumble over: they take it for a property.
+// The second name was added later, so that older readers are not confused: they read it as a property.
 bool isSignature(std::string_view name) {
     return name == "signature" || name == "x-signature";
 }
 
-// What follows the prefix, whether that is declared or not.
+// The name after the prefix, declared or not.
 std::string_view localName(std::string_view name) {
     const std::size_t colon = name.find(':');
     if (colon == std::string_view::npos) return name;
@@ -50,8 +50,8 @@ class TableOfContentsReader::Document final : public foundation::XMLEvents {
   private:
     // An open element that is a property.
     struct Property {
-        std::size_t parentPath;  // length of the path it was opened in
-        bool counts;             // it is the first one of its path
+        std::size_t parentPath;  // length of the path of its parent
+        bool counts;             // the first one of its path
         std::string text;        // so far
     };
 
@@ -132,7 +132,7 @@ class TableOfContentsReader::Document final : public foundation::XMLEvents {
     std::vector<Property> open_;
     std::string path_;
     std::size_t depth_ = 0;
-    std::size_t passedOver_ = 0;  // the depth of the element that is passed over; 0 for none
+    std::size_t passedOver_ = 0;  // the depth of the skipped element; 0 for none
     std::size_t elements_ = 0;
     std::size_t kept_ = 0;
     bool found_ = false;

@@ -1,4 +1,4 @@
-// The table of contents: an XML document, of which a few things are kept. For this folder only.
+// The table of contents: an XML document, of which a few values are kept. For this folder only.
 //
 //   <xar>
 //     <toc>
@@ -9,13 +9,13 @@
 //     </toc>
 //   </xar>
 //
-// Elements go by their local names. A child of `toc` is a signature, by either of its names, a file, or a
-// property; what is inside the first two is passed over. Of several properties at one path the first one
-// counts, but a second checksum, or a second offset or size in it, is refused: readers must not differ in
-// what is checked.
+// Elements are recognised by their local names. A child of `toc` is a signature, by either of its names, a
+// file, or a property; the contents of the first two are skipped. If several properties have one path, the
+// first one counts. But a second checksum, or a second offset or size in it, is refused, because all readers
+// must check the same bytes.
 //
-// Refused besides: what foundation/xml_parser.h refuses, and any document type; a root other than `xar`; no
-// `toc`, or two; and what passes a limit below.
+// Also refused: every document that foundation/xml_parser.h refuses, and any document type; a root other than
+// `xar`; no `toc`, or two; and tables that exceed a limit below.
 #pragma once
 
 #include <cstdint>
@@ -32,7 +32,7 @@ namespace pinwell::xar {
 /// Length of the table of contents, compressed and uncompressed alike: some hundred thousand files.
 inline constexpr std::uint64_t kMaximumTableOfContents = 64ULL * 1024 * 1024;
 
-/// Elements inside one another, the root included.
+/// Depth of nested elements, with the root.
 inline constexpr std::size_t kMaximumDepth = 64;
 
 inline constexpr std::size_t kMaximumElements = 4 * 1024 * 1024;
@@ -42,14 +42,14 @@ inline constexpr std::size_t kMaximumProperties = 4096;
 /// Length of a property's path, in bytes.
 inline constexpr std::size_t kMaximumPath = 1024;
 
-/// What is kept of a table, styles and the text of properties, in bytes.
+/// Kept styles and property texts of a table, in bytes.
 inline constexpr std::size_t kMaximumKept = 1024 * 1024;
 
 struct TableOfContents {
-    /// Each signature's style, in document order; `nullopt` for one that has none.
+    /// Each signature's style, in document order; `nullopt` for a signature without a style.
     std::vector<std::optional<std::string>> signatures;
 
-    /// Text by path ("checksum/size"); `nullopt` for an element without any, or with white space alone.
+    /// Text by path ("checksum/size"); `nullopt` for an element without text, or with only white space.
     std::map<std::string, std::optional<std::string>, std::less<>> properties;
 
     std::optional<std::string> checksumStyle;
@@ -64,10 +64,10 @@ class TableOfContentsReader {
     TableOfContentsReader(const TableOfContentsReader&) = delete;
     TableOfContentsReader& operator=(const TableOfContentsReader&) = delete;
 
-    /// Returns false if the document is refused: then no more must be fed. Throws std::bad_alloc.
+    /// Returns false if the document is refused; then feed no more. Throws std::bad_alloc.
     bool feed(foundation::ByteView bytes);
 
-    /// Once, and last. Returns `nullopt` if the document is refused. Throws std::bad_alloc.
+    /// Call it once, and last. Returns `nullopt` if the document is refused. Throws std::bad_alloc.
     std::optional<TableOfContents> finish();
 
   private:

@@ -10,7 +10,7 @@
 
 using pinwell::xar::Archive;
 
-// A signature knows its archive and its number: with those it finds its style, the checksum and the next one.
+// A signature has its archive and its number, which lead to its style, the checksum and the next signature.
 struct xar_archive_signature {
     xar_t archive;
     std::size_t number;
