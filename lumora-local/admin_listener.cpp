@@ -94,18 +94,23 @@ std::shared_ptr<const TicketSigner> AdminListener::signer() const {
     return signer_;
 }
 
-void AdminListener::reload(const ServiceDirectory& directory) {
-    const auto attempt = [&](const char* kept, const auto& work) {
-        try {
-            work();
-        } catch (const Failure& failure) {
-            output_.err(format("%s; the service goes on with %s", failure.what(), kept));
-        }
-    };
+template <class Work>
+void AdminListener::attempt(const char* kept, Work&& work) const {
+    try {
+        work();
+    } catch (const Failure& failure) {
+        output_.err(format("%s; the service goes on with %s", failure.what(), kept));
+    }
+}
+
+void AdminListener::reloadAccess() {
     attempt("the access list that it has", [&] {
         access_.reload();
         output_.out("read access.toml again");
     });
+}
+
+void AdminListener::reload(const ServiceDirectory& directory) {
     attempt("the client authorities that it has", [&] { tls_.reload(tlsFilesOf(directory, options_)); });
     attempt("the signer that it has", [&] { reloadSigner(directory); });
 }

@@ -36,11 +36,15 @@ class AdminListener {
     /// Serves, with threads of its own, at most `connections` at once.
     void start(int stopDescriptor, std::size_t connections);
 
-    /// Reads access.toml, certificates and a key in a file again. What cannot be used stays as it was, and
-    /// the error log says so.
+    /// Reads access.toml again. If it cannot be used, the list stays as it was, and the error log says so.
+    void reloadAccess();
+
+    /// Reads certificates and a key in a file again, as reloadAccess() does.
     void reload(const ServiceDirectory& directory);
 
   private:
+    template <class Work>
+    void attempt(const char* kept, Work&& work) const;
     std::shared_ptr<const TicketSigner> signer() const;
     void reloadSigner(const ServiceDirectory& directory);
 

@@ -15,17 +15,16 @@ namespace {
 
 using foundation::format;
 
-constexpr mode_t kPrivateDirectoryMode = 0700;
-constexpr mode_t kPublicFileMode = 0644;
-constexpr mode_t kPrivateFileMode = 0600;
+constexpr mode_t kFolderMode = 0700;
+constexpr mode_t kCertificateMode = 0644;
+constexpr mode_t kKeyMode = 0600;
 
 /// Certificate and key under these names, both or none.
-void writeIdentity(const std::string& folder, const std::string& name, const Identity& identity) {
-    PendingDirectory pending(folder, kPrivateDirectoryMode);
+void writePair(const std::string& folder, const std::string& name, const Identity& identity) {
+    PendingDirectory pending(folder, kFolderMode);
     writeNewFile(pending.path() + "/" + name + ".pem", foundation::asBytes(identity.certificate),
-                 kPublicFileMode);
-    writeNewFile(pending.path() + "/" + name + ".key", foundation::asBytes(identity.privateKey),
-                 kPrivateFileMode);
+                 kCertificateMode);
+    writeNewFile(pending.path() + "/" + name + ".key", foundation::asBytes(identity.privateKey), kKeyMode);
     flushDirectory(pending.path());
     pending.publish();
 }
@@ -42,7 +41,7 @@ IssuerFiles requireAuthority(const ServiceDirectory& directory, foundation::Date
         if (!directory.settings().passphraseFile.empty())
             passphrase.read(directory.settings().passphraseFile);
         try {
-            writeIdentity(folder, "ca", createClientAuthority(now, passphrase.text()));
+            writePair(folder, "ca", createClientAuthority(now, passphrase.text()));
         } catch (const Failure&) {
             if (!exists(clientAuthorityPath(directory))) throw;  // another process was faster
         }
@@ -63,7 +62,7 @@ void makeClientCertificate(const ServiceDirectory& directory, const std::string&
                                        name, kMaximumClientName));
     }
     const IssuerFiles authority = requireAuthority(directory, now);
-    writeIdentity(folder, "client", issueClient(authority, name, now));
+    writePair(folder, "client", issueClient(authority, name, now));
 }
 
 }  // namespace pinwell::lumora

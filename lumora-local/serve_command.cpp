@@ -187,6 +187,7 @@ class MetricsSource {
 /// From the files that service.json names now, which may be others than before.
 void reload(const std::string& path, TlsContext& tls, MetricsSource& metrics, AdminListener* admin,
             const ServeOutput& output) {
+    if (admin != nullptr) admin->reloadAccess();  // whatever becomes of the rest
     try {
         const ServiceDirectory directory = ServiceDirectory::open(path);
         if (admin != nullptr) admin->reload(directory);

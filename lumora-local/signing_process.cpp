@@ -1,6 +1,8 @@
 #include "lumora-local/signing_process.h"
 
+#include <signal.h>
 #include <sys/socket.h>
+#include <sys/time.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -31,6 +33,9 @@ using foundation::FileDescriptor;
 constexpr std::size_t kDigestSize = 32;
 constexpr std::size_t kAnswerHead = 3;
 constexpr std::size_t kMaximumAnswer = 4096;
+
+// For a signature. Opening a token may take its owner longer.
+constexpr timeval kPatience{30, 0};
 
 /// Returns false at the end of the stream, and if it fails.
 bool readFully(int descriptor, std::byte* room, std::size_t size) {
@@ -104,6 +109,7 @@ class KeyBehindProcess final : public SigningKey {
         theirs.reset();
         try {
             publicKey_ = receive();
+            ::setsockopt(ours_.get(), SOL_SOCKET, SO_RCVTIMEO, &kPatience, sizeof kPatience);
         } catch (const Failure&) {
             end();
             throw;
@@ -119,7 +125,7 @@ class KeyBehindProcess final : public SigningKey {
     Data sign(ByteView message) const override {
         const Data digest = sha256(message);
         const std::lock_guard lock(mutex_);
-        if (!writeFully(ours_.get(), digest)) failTalking();
+        if (!ours_ || !writeFully(ours_.get(), digest)) failTalking();
         return receive();
     }
 
@@ -129,30 +135,38 @@ class KeyBehindProcess final : public SigningKey {
                                                    std::generic_category().message(errno)));
     }
     [[noreturn]] static void failTalking() {
-        throw Failure(EX_IOERR, "the process that speaks to the token has ended");
+        throw Failure(EX_IOERR, "the process that speaks to the token has ended, or does not answer");
+    }
+
+    /// An answer that comes too late is never taken for the next one: nothing is asked after it.
+    [[noreturn]] void giveUp() const {
+        ours_.reset();
+        failTalking();
     }
 
     Data receive() const {
         std::array<std::byte, kAnswerHead> head{};
-        if (!readFully(ours_.get(), head.data(), head.size())) failTalking();
+        if (!readFully(ours_.get(), head.data(), head.size())) giveUp();
         const std::size_t size = std::to_integer<std::size_t>(head[1]) | std::to_integer<std::size_t>(head[2])
                                                                              << 8U;
-        if (size > kMaximumAnswer) failTalking();
+        if (size > kMaximumAnswer) giveUp();
         Data bytes(size);
-        if (!readFully(ours_.get(), bytes.data(), size)) failTalking();
+        if (!readFully(ours_.get(), bytes.data(), size)) giveUp();
         const int status = std::to_integer<int>(head[0]);
         if (status != EX_OK) throw Failure(status, foundation::toString(bytes));
         return bytes;
     }
 
-    /// The child ends when nothing can be asked any more.
+    /// The child ends when nothing can be asked any more; one whose token does not answer is ended.
     void end() {
+        const bool answers = static_cast<bool>(ours_);
         ours_.reset();
+        if (!answers && child_ > 0) ::kill(child_, SIGKILL);
         while (child_ > 0 && ::waitpid(child_, nullptr, 0) < 0 && errno == EINTR) continue;
     }
 
     mutable std::mutex mutex_;
-    FileDescriptor ours_;
+    mutable FileDescriptor ours_;
     pid_t child_ = -1;
     Data publicKey_;
 };

@@ -203,6 +203,16 @@ TEST_F(AdminServeTest, ReadsItsAccessListAgainOnHangUp) {
         << end.errors;
 }
 
+TEST_F(AdminServeTest, ReadsItsAccessListAgainWhateverServiceJsonSays) {
+    AdminInstance instance(service_);
+    EXPECT_EQ(instance.client("auditor").get("/v1/records").status, 200);
+    writeFile(service_.path() + "/service/service.json", "{");
+    writeFile(service_.accessPath(), "[clients]\n");
+    instance.process().sendSignal(SIGHUP);
+    ASSERT_TRUE(instance.process().waitForLine("read access.toml again"));
+    EXPECT_EQ(instance.client("auditor").get("/v1/records").status, 403);
+}
+
 TEST_F(AdminServeTest, EndsConnectionsThatAnEarlierAuthorityVouchedFor) {
     AdminInstance instance(service_);
     AdminClient client = instance.client("auditor");

@@ -238,6 +238,22 @@ TEST_F(AdminServiceTest, RefusesAlsoWhatItCannotNote) {
     EXPECT_EQ(errors_, "cannot note a refused attempt of client: no store");
 }
 
+TEST_F(AdminServiceTest, ShowsLabelsInAnyEncoding) {
+    Record record;
+    record.name = "2/2/" + std::string(40, 'a');
+    record.label = "caf\xE9\x1B[2J";
+    record.hashes = {{2, foundation::Data(20, std::byte{0xAA})}};
+    store_->put(Environment::production, {{record, foundation::toData("ticket")}},
+                {foundation::Date{100}, "tester", std::nullopt, "", false});
+    const RequestHead request = head("GET", "/v1/records", "reader");
+    for (const AdminRoute& route : readingRoutes(*store_)) {
+        const Answer answer = route.handle({request, route.path, {}, {}, std::nullopt, {}});
+        EXPECT_TRUE(foundation::parseJSON(foundation::asBytes(answer.body))) << answer.body;
+        EXPECT_NE(answer.body.find("caf"), std::string::npos);
+        EXPECT_EQ(answer.body.find('\x1B'), std::string::npos);
+    }
+}
+
 TEST(RecordSearchOf, TakesItsParameters) {
     const RecordSearch search = recordSearchOf(
         {{"label", "Example"}, {"environment", "development"}, {"limit", "7"}, {"after", "4578:2/2/ab"}});

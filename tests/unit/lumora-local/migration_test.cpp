@@ -51,6 +51,7 @@ class MigrationTest : public testing::Test {
                   occasion);
         store.put(kProduction, {makeRecord("a", "second", true)}, occasion);
         store.put(Environment::development, {makeRecord("c", "third")}, occasion);
+        store.noteRefusal({kProduction, ""}, occasion);
     }
 
     ServiceDirectory directory() const { return ServiceDirectory::open(service_); }
@@ -82,16 +83,16 @@ TEST_F(MigrationTest, CopiesAllAndNamesTheDatabase) {
     const std::string before = description();
     const Migration migration = migrate(directory(), url);
     EXPECT_EQ(migration.records, 3U);
-    EXPECT_EQ(migration.events, 4U);
+    EXPECT_EQ(migration.events, 5U);
     EXPECT_EQ(readFile(migration.oldDescription), before);
     EXPECT_EQ(directory().storeUrl(), url);
     const std::unique_ptr<RecordStore> store = openStore(directory());
     EXPECT_EQ(summarize(*store), summarize(old));
-    EXPECT_EQ(verifyHistory(*store, migration.head).events, 4U);
+    EXPECT_EQ(verifyHistory(*store, migration.head).events, 5U);
     EXPECT_EQ(store->countRecords(), 3U);
     // The chain goes on.
     store->put(kProduction, {makeRecord("d", "fourth")}, {Date{200}, "tester", std::nullopt, "", false});
-    EXPECT_EQ(verifyHistory(*store, migration.head).events, 5U);
+    EXPECT_EQ(verifyHistory(*store, migration.head).events, 6U);
 }
 
 TEST_F(MigrationTest, LeavesTheOldStoreToNobody) {
