@@ -1,6 +1,5 @@
 #include "lumora-local/signing_process.h"
 
-#include <signal.h>
 #include <sys/socket.h>
 #include <sys/time.h>
 #include <sys/wait.h>
@@ -157,11 +156,11 @@ class KeyBehindProcess final : public SigningKey {
         return bytes;
     }
 
-    /// The child ends when nothing can be asked any more; one whose token does not answer is ended.
+    /// The child ends when nothing can be asked any more. One whose token does not answer is not waited for.
     void end() {
         const bool answers = static_cast<bool>(ours_);
         ours_.reset();
-        if (!answers && child_ > 0) ::kill(child_, SIGKILL);
+        if (!answers) return;
         while (child_ > 0 && ::waitpid(child_, nullptr, 0) < 0 && errno == EINTR) continue;
     }
 
