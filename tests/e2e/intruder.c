@@ -86,7 +86,7 @@ static void act(void) {
 }
 
 typedef int (*XmlReader)(void* parser, const char* text, int length, int isLast);
-typedef int (*TlsReader)(void* connection, void* buffer, int length);
+typedef int (*TlsReader)(void* connection, void* buffer, size_t length, size_t* count);
 
 int XML_Parse(void* parser, const char* text, int length, int isLast);
 int XML_Parse(void* parser, const char* text, int length, int isLast) {
@@ -96,10 +96,10 @@ int XML_Parse(void* parser, const char* text, int length, int isLast) {
     return next(parser, text, length, isLast);
 }
 
-int SSL_read(void* connection, void* buffer, int length);
-int SSL_read(void* connection, void* buffer, int length) {
+int SSL_read_ex(void* connection, void* buffer, size_t length, size_t* count);
+int SSL_read_ex(void* connection, void* buffer, size_t length, size_t* count) {
     if (getenv("INTRUDER_READS_TLS") != NULL) act();
     TlsReader next = NULL;
-    *(void**)&next = dlsym(RTLD_NEXT, "SSL_read");
-    return next(connection, buffer, length);
+    *(void**)&next = dlsym(RTLD_NEXT, "SSL_read_ex");
+    return next(connection, buffer, length, count);
 }
