@@ -152,6 +152,8 @@ void logExistingRecords(SQLite::Database& database) {
 void configureSqlite(SQLite::Database& database) {
     database.exec("PRAGMA foreign_keys = ON");
     database.exec("PRAGMA synchronous = FULL");
+    // The process may write in its own directory only, and SQLite's temporary files are elsewhere.
+    database.exec("PRAGMA temp_store = MEMORY");
 }
 
 void createSqliteSchema(SQLite::Database& database) {

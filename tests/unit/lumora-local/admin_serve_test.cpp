@@ -107,6 +107,19 @@ TEST_F(AdminServeTest, ListsEveryHashInTheTicketTheRecordsOwnFirst) {
     EXPECT_EQ(*listed[1].string(), recordNamed(2));
 }
 
+// The service may write in its own directory only, and a change of many rows must not need another place.
+TEST_F(AdminServeTest, ReissuesAndRevokesARecordOfThousandsOfHashes) {
+    AdminInstance instance(service_);
+    AdminClient manager = instance.client("manager");
+    std::string hashes = "\"hashes\":[";
+    for (int i = 2; i < 4000; ++i) hashes += (i > 2 ? ",\"" : "\"") + recordNamed(i) + "\"";
+    const std::string body = bodyFor(recordNamed(1), hashes + "]");
+    EXPECT_EQ(manager.post(kTickets, body).status, 201);
+    EXPECT_EQ(manager.post(kTickets, body).status, 200);
+    const AdminAnswer revoked = manager.post(kRevocations, bodyFor(recordNamed(1)));
+    EXPECT_EQ(revoked.status, 200) << revoked.body;
+}
+
 TEST_F(AdminServeTest, HoldsToTheRulesOfTheCommandLine) {
     AdminInstance instance(service_);
     AdminClient manager = instance.client("manager");
