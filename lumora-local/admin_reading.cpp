@@ -5,6 +5,7 @@
 #include "foundation/json.h"
 #include "foundation/value.h"
 #include "lumora-local/admin_routes.h"
+#include "lumora-local/code_hash.h"
 #include "lumora-local/problem.h"
 #include "lumora-local/rfc3339.h"
 
@@ -64,22 +65,9 @@ Environment environmentOf(const Query& query) {
     return *environment;
 }
 
-/// Lower-case hexadecimal digits, two a byte.
-std::optional<Data> bytesIn(std::string_view hex) {
-    Data bytes;
-    for (std::size_t i = 0; i + 1 < hex.size(); i += 2) {
-        unsigned byte = 0;
-        const auto [rest, error] = std::from_chars(hex.data() + i, hex.data() + i + 2, byte, 16);
-        if (error != std::errc{} || rest != hex.data() + i + 2) return std::nullopt;
-        bytes.push_back(static_cast<std::byte>(byte));
-    }
-    if (foundation::toHex(bytes) != hex) return std::nullopt;
-    return bytes;
-}
-
 Data hashOf(const std::string& text) {
     if (const std::optional<CodeHash> named = parseRecordName(text)) return named->hash;
-    std::optional<Data> bytes = bytesIn(text);
+    std::optional<Data> bytes = parseHex(text);
     if (!bytes || (bytes->size() != hashLength(2) && bytes->size() != hashLength(4)))
         refuse("hash", "is neither 40 nor 96 lower-case hexadecimal digits, nor a record's name");
     return *std::move(bytes);
@@ -87,7 +75,7 @@ Data hashOf(const std::string& text) {
 
 RecordCursor recordCursorIn(const std::string& text) {
     const std::size_t colon = text.find(':');
-    const auto label = bytesIn(std::string_view(text).substr(0, std::min(colon, text.size())));
+    const auto label = parseHex(std::string_view(text).substr(0, std::min(colon, text.size())));
     if (colon == std::string::npos || !label) refuse("after", "is not what a page gave as \"next\"");
     RecordCursor cursor{foundation::toString(*label), text.substr(colon + 1)};
     if (cursor.name.empty() || !isPrintable(cursor.name))

@@ -9,8 +9,10 @@ std::optional<unsigned> hexDigit(char c) {
     return std::nullopt;
 }
 
-std::optional<foundation::Data> parseHex(std::string_view text, std::size_t length) {
-    if (text.size() != 2 * length) return std::nullopt;
+}  // namespace
+
+std::optional<foundation::Data> parseHex(std::string_view text) {
+    if (text.size() % 2 != 0) return std::nullopt;
     foundation::Data bytes;
     for (std::size_t i = 0; i < text.size(); i += 2) {
         const auto high = hexDigit(text[i]);
@@ -20,8 +22,6 @@ std::optional<foundation::Data> parseHex(std::string_view text, std::size_t leng
     }
     return bytes;
 }
-
-}  // namespace
 
 std::optional<std::size_t> hashLength(std::uint32_t algorithm) {
     if (algorithm <= 3) return 20;
@@ -47,7 +47,8 @@ std::optional<CodeHash> parseRecordName(std::string_view name) {
         name.remove_prefix(4);
     }
     const std::optional<std::size_t> length = hashLength(parsed.algorithm);
-    std::optional<foundation::Data> hash = length ? parseHex(name, *length) : std::nullopt;
+    if (!length || name.size() != 2 * *length) return std::nullopt;
+    std::optional<foundation::Data> hash = parseHex(name);
     if (!hash) return std::nullopt;
     parsed.hash = *std::move(hash);
     return parsed;
