@@ -1,4 +1,4 @@
-// Where the body of a response goes.
+// Receives the body of a response.
 #pragma once
 
 #include "foundation/bytes.h"
@@ -14,7 +14,7 @@ class BodySink {
     virtual std::optional<Error> write(foundation::ByteView bytes) = 0;
 };
 
-/// Keeps it in memory.
+/// Keeps the body in memory.
 class MemorySink : public BodySink {
   public:
     std::optional<Error> write(foundation::ByteView bytes) override {

@@ -9,8 +9,8 @@
 namespace pinwell::https {
 namespace {
 
-// What a trust object checks until the delegate chooses a policy: the platform's anchors alone, for this
-// host, so that a delegate that forgets to choose is too strict and not too lax.
+// The policy of a trust object until the delegate chooses one: only the platform's anchors, for this host. So
+// a delegate that forgets to choose is too strict, not too lax.
 trust::PolicyRef initialPolicy(const std::string& host) {
     namespace option = trust::option;
     trust::Policy policy;
@@ -35,7 +35,7 @@ std::shared_ptr<trust::Trust> makeTrust(trust::TrustService& service, const std:
     return status == trust::kSuccess ? trust : nullptr;
 }
 
-// Outlives the call of the delegate, which may wrongly keep the completion and call it later.
+// Outlives the delegate's call, because a faulty delegate may keep the completion and call it later.
 struct Answer {
     std::mutex mutex;
     bool given = false;
@@ -58,7 +58,7 @@ bool ask(const ChallengeContext& context, const std::string& host,
                                              {host, AuthenticationMethod::serverTrust, trust}, completion);
     });
     const std::lock_guard lock(answer->mutex);
-    answer->given = true;  // what comes later is too late
+    answer->given = true;  // later calls are ignored
     return answer->accepted;
 }
 

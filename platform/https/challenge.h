@@ -1,4 +1,4 @@
-// The question put to a session's delegate: may we talk to this server?
+// Asks a session's delegate whether to accept a server.
 #pragma once
 
 #include <string>
@@ -8,7 +8,7 @@
 
 namespace pinwell::https {
 
-/// Whom to ask, and where.
+/// The delegate, and its queue.
 struct ChallengeContext {
     Session& session;
     SessionDelegate& delegate;
@@ -16,9 +16,9 @@ struct ChallengeContext {
     trust::TrustService& trust;
 };
 
-/// Asks the delegate on the queue and waits for its answer. Nothing when it accepts: with a credential for
-/// the trust object it was given, before it returns; only its first answer counts. Every other outcome is an
-/// error.
+/// Asks the delegate on the queue and waits for its decision. Returns `nullopt` if it accepts: with a
+/// credential for the given trust object, before it returns; only its first decision counts. Every other
+/// outcome is an error.
 std::optional<Error> challengeDelegate(const ChallengeContext& context, const std::string& host,
                                        const std::vector<Data>& certificates);
 

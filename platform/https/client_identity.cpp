@@ -26,7 +26,7 @@ struct FreeList {
 };
 using ListHandle = std::unique_ptr<STACK_OF(X509), FreeList>;
 
-// Whatever OpenSSL has to say of the files is said in our words; nothing stays in the thread's queue.
+// Our own words describe OpenSSL's errors about the files; nothing stays in the thread's queue.
 struct QuietErrors {
     QuietErrors() { ERR_set_mark(); }
     ~QuietErrors() { ERR_pop_to_mark(); }
@@ -38,7 +38,7 @@ Error wrongFile(std::string text) {
     return {foundation::kDataErrorDomain, foundation::kMalformedDocument, std::move(text)};
 }
 
-// Asked only for an encrypted key, before anything is made of it.
+// Called only for an encrypted key, before it is decrypted.
 int refusePassphrase(char*, int, int, void* asked) {
     *static_cast<bool*>(asked) = true;
     return -1;
@@ -78,7 +78,7 @@ Result<Certificates> readCertificates(const std::string& path) {
         if (!certificates.own)
             certificates.own = std::move(certificate);
         else if (sk_X509_push(certificates.issuers.get(), certificate.get()) > 0)
-            static_cast<void>(certificate.release());  // the list has it
+            static_cast<void>(certificate.release());  // the list owns it
     }
     if (ERR_GET_REASON(ERR_peek_last_error()) != PEM_R_NO_START_LINE)
         return wrongFile(foundation::format("Certificate number %zu in %@ cannot be read.", count + 1, path));

@@ -26,8 +26,8 @@ void* ConnectionSlot::handleFor(const Target& target) {
     return handle_.get();
 }
 
-// Between two exchanges of HTTP/1 a server has nothing to say: what is there to be read is its end, or what
-// would be taken for the next answer. HTTP/2 numbers its answers, and the library looks for its end itself.
+// Between two exchanges of HTTP/1 a server must not send anything. Readable bytes are its end, or would be
+// read as the next response. HTTP/2 numbers its responses, and the library checks for its end itself.
 bool ConnectionSlot::isQuiet() const noexcept {
     if (socket_ < 0 || !trust_) return false;
     if (trust_->agreedOnHTTP2()) return true;

@@ -1,7 +1,7 @@
-// Where a connection waits for the next exchange.
+// Keeps a connection for the next exchange.
 //
-// A slot holds one connection at most, to one host and port. Each session has a slot of its own, used by its
-// worker alone: the transfer library's handles are not for two threads at once, and its own way to share
+// A slot holds at most one connection, to one host and port. Each session has its own slot, which only its
+// worker uses: two threads must not use one handle of the transfer library. The library's own sharing of
 // connections between threads is not safe in the releases that we support.
 #pragma once
 
@@ -19,24 +19,24 @@ class ConnectionSlot {
     ConnectionSlot(const ConnectionSlot&) = delete;
     ConnectionSlot& operator=(const ConnectionSlot&) = delete;
 
-    /// The handle (a CURLM) for exchanges with this target. What is held for another one is dropped, and so
-    /// is a connection on which something has come that nobody asked for. Null if none can be made.
+    /// The handle (a CURLM) for exchanges with this target. A connection to another target is dropped, and so
+    /// is one with unexpected input. Returns null if no handle can be made.
     void* handleFor(const Target& target);
 
-    /// A connection is being made: its TLS context. False if it cannot be made strict.
+    /// Prepares the TLS context of a new connection. Returns false if it cannot be made strict.
     bool prepare(void* tlsContext, ServerTrust::Judge judge) noexcept;
 
-    /// What is known of the connection that was prepared last; null if none was.
+    /// The state of the connection prepared last; null if there is none.
     const ServerTrust* trust() const noexcept { return trust_.get(); }
 
-    /// A request is about to be sent from this port. Returns false if that is not the connection that was
-    /// judged.
+    /// Call it before a request is sent from this port. Returns false if that is not the judged
+    /// connection.
     bool confirm(int localPort) noexcept;
 
-    /// The exchange is over: keeps its connection, whose socket is this one.
+    /// Call it after the exchange: keeps its connection, with this socket.
     void keep(int socket) noexcept;
 
-    /// Closes what is held.
+    /// Closes the connection.
     void drop() noexcept;
 
   private:
@@ -49,8 +49,8 @@ class ConnectionSlot {
     std::string host_;
     std::string port_;
     std::shared_ptr<ServerTrust> trust_;
-    int localPort_ = 0;  // of the connection; 0: not known yet
-    int socket_ = -1;    // the handle's own
+    int localPort_ = 0;  // of the connection; 0: unknown
+    int socket_ = -1;    // of the handle
 };
 
 }  // namespace pinwell::https

@@ -23,7 +23,7 @@ Error writeError(int number, const std::string& path) {
 // Files that exit() must remove: it runs no destructors of objects on any stack.
 class Leftovers {
   public:
-    // Never destroyed, since other threads may still have downloads while the process ends.
+    // Never destroyed, because other threads may still have downloads while the process ends.
     static Leftovers& shared() {
         static Leftovers& leftovers = *new Leftovers;
         return leftovers;
@@ -59,7 +59,7 @@ class Leftovers {
 
 foundation::Result<std::unique_ptr<DownloadFile>> DownloadFile::create(const URL& directory) {
     std::string path = directory.appendingPathComponent("pinwell-download-XXXXXX").path();
-    foundation::FileDescriptor file(::mkostemp(path.data(), O_CLOEXEC));  // O_EXCL and 0600 are its own
+    foundation::FileDescriptor file(::mkostemp(path.data(), O_CLOEXEC));  // it adds O_EXCL and 0600
     if (!file) return writeError(errno, path);
     return std::unique_ptr<DownloadFile>(new DownloadFile(std::move(file), std::move(path)));
 }

@@ -1,4 +1,4 @@
-// The temporary file that a download is kept in.
+// The temporary file of a download.
 #pragma once
 
 #include <memory>
@@ -9,8 +9,8 @@
 
 namespace pinwell::https {
 
-/// A new file of mode 0600 that nobody else could have put there. It goes away with this object, and also
-/// when the process is ended by exit() while the object lives: whoever is told of a finished download may do
+/// A new file of mode 0600 that nobody else could have created. It is removed with this object. It is also
+/// removed if exit() ends the process while the object lives: the callback for a finished download may do
 /// that.
 class DownloadFile : public BodySink {
   public:

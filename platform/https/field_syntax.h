@@ -15,7 +15,7 @@ inline bool isToken(std::string_view text) noexcept {
     return !text.empty() && std::all_of(text.begin(), text.end(), tokenCharacter);
 }
 
-/// A field's value as we send it: no control character but the tab.
+/// A field's value as we send it: no control character except the tab.
 inline bool isFieldValue(std::string_view text) noexcept {
     return std::none_of(text.begin(), text.end(), [](char c) {
         const auto byte = static_cast<unsigned char>(c);

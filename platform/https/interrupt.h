@@ -1,4 +1,4 @@
-// A flag that one thread raises and another one can wait for together with its sockets.
+// A flag that one thread raises, and for which another can wait together with its sockets.
 #pragma once
 
 #include <sys/eventfd.h>
@@ -22,12 +22,12 @@ class Interrupt {
     void raise() noexcept {
         raised_ = true;
         const std::uint64_t one = 1;
-        // Fails only when the counter is full, and then the descriptor is readable already.
+        // Fails only if the counter is full; then the descriptor is already readable.
         [[maybe_unused]] const ssize_t ignored = ::write(event_.get(), &one, sizeof one);
     }
     bool isRaised() const noexcept { return raised_; }
 
-    /// Readable from when it was raised.
+    /// Readable after it was raised.
     int descriptor() const noexcept { return event_.get(); }
 
   private:

@@ -14,7 +14,7 @@ bool becomesGet(const std::string& method, int status) {
     return status == 303 && method != "HEAD";
 }
 
-// Scheme, host and port in front of the path: two URLs that share it talk to the same server.
+// Scheme, host and port before the path: two URLs with the same origin use the same server.
 std::string_view originOf(const std::string& text) {
     const std::size_t authority = text.find("://");
     if (authority == std::string::npos) return text;

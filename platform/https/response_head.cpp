@@ -12,7 +12,7 @@ namespace {
 
 constexpr std::string_view kBlank = " \t";
 
-// The fields that the transfer library acts on. It may see the first line of a folded one only.
+// The fields that the transfer library uses. It may see only the first line of a folded one.
 constexpr std::array<std::string_view, 3> kFieldsOnOneLine{"Content-Length", "Transfer-Encoding", "Location"};
 
 std::string_view trimmed(std::string_view text) {
@@ -31,7 +31,7 @@ bool isSameName(std::string_view a, std::string_view b) {
     return !less(a, b) && !less(b, a);
 }
 
-// "4", or "4, 4" of a sender, or something on the way, that wrote the field twice.
+// "4", or "4, 4" if the sender or a proxy wrote the field twice.
 bool isOneLength(std::string_view list) {
     const std::string_view first = trimmed(list.substr(0, list.find(',')));
     if (first.empty() || !std::all_of(first.begin(), first.end(), isDigit)) return false;
@@ -50,7 +50,7 @@ ResponseHead::Line ResponseHead::addLine(std::string_view line) {
     if (bytes_ > maximumBytes_ || line.size() > kMaximumHeaderLine) return Line::tooLarge;
     if (complete_) return ++fields_ <= maximumFields_ ? Line::taken : Line::tooLarge;
     const std::string_view text = withoutLineEnd(line);
-    // RFC 9110, section 5.5: of all control characters these are the dangerous ones.
+    // RFC 9110, section 5.5: of all control characters only these are dangerous.
     if (text.find_first_of(std::string_view("\0\r\n", 3)) != std::string_view::npos) return Line::malformed;
     if (isAtStart_) return startResponse(text) ? Line::taken : Line::malformed;
     if (text.empty()) {
@@ -106,7 +106,7 @@ bool ResponseHead::startResponse(std::string_view statusLine) {
     headers_.clear();
     lastName_.clear();
     std::from_chars(digits.data(), digits.data() + digits.size(), status_);
-    return status_ != 101;  // nobody asked to switch
+    return status_ != 101;  // we never request a switch
 }
 
 bool ResponseHead::addField(std::string_view line) {

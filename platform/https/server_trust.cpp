@@ -28,8 +28,8 @@ std::optional<Data> derOf(const X509* certificate) {
     return Data(view.begin(), view.end());
 }
 
-// What the server sent, the leaf first. Nothing when there is none, too many, or one that cannot be written
-// out.
+// The server's certificates, the leaf first. `nullopt` if there are none, too many, or one that cannot be
+// encoded.
 std::optional<std::vector<Data>> peerCertificates(const X509_STORE_CTX* context) {
     const X509* const leaf = X509_STORE_CTX_get0_cert(context);
     STACK_OF(X509)* const sent = X509_STORE_CTX_get0_untrusted(context);
@@ -50,7 +50,7 @@ std::optional<std::vector<Data>> peerCertificates(const X509_STORE_CTX* context)
     return list;
 }
 
-// Settled before the certificates come, in each version of the handshake.
+// Decided before the certificates arrive, in each version of the handshake.
 bool hasAgreedOnHTTP2(X509_STORE_CTX* context) {
     const auto* const connection =
         static_cast<SSL*>(X509_STORE_CTX_get_ex_data(context, SSL_get_ex_data_X509_STORE_CTX_idx()));
@@ -64,8 +64,8 @@ int verifyThunk(X509_STORE_CTX* context, void* self) {
     return static_cast<ServerTrust*>(self)->verify(context) ? 1 : 0;
 }
 
-// Sees records' heads and alerts (RFC 8446, sections 5.1 and 6). A head ends with the record's length; an
-// alert is two bytes, level and description.
+// Gets the heads of records, and alerts (RFC 8446, sections 5.1 and 6). A head ends with the record's length;
+// an alert is two bytes, level and description.
 void messageThunk(int isWritten, int, int contentType, const void* bytes, std::size_t length, SSL*,
                   void* self) {
     if (isWritten != 0) return;
@@ -85,7 +85,7 @@ void freeShare(void*, void* share, CRYPTO_EX_DATA*, int, long, void*) {
         static_cast<std::shared_ptr<ServerTrust>*>(share));
 }
 
-// Where a context keeps its share of the object.
+// The context's index for its share of the object.
 int sharePlace() {
     static const int place = SSL_CTX_get_ex_new_index(0, nullptr, nullptr, nullptr, freeShare);
     return place;
@@ -105,17 +105,17 @@ std::shared_ptr<ServerTrust> ServerTrust::install(void* context, Judge judge) no
         return nullptr;  // the caller is C
     }
     SSL_CTX_set_cert_verify_callback(tls, verifyThunk, trust.get());
-    SSL_CTX_set_verify(tls, SSL_VERIFY_PEER, nullptr);  // without it a refusal would be noted and passed over
+    SSL_CTX_set_verify(tls, SSL_VERIFY_PEER, nullptr);  // without it a refusal would be noted and ignored
     SSL_CTX_set_session_cache_mode(tls, SSL_SESS_CACHE_OFF);
     SSL_CTX_set_options(tls, SSL_OP_NO_TICKET | SSL_OP_NO_RENEGOTIATION);
     SSL_CTX_set_msg_callback(tls, messageThunk);
     SSL_CTX_set_msg_callback_arg(tls, trust.get());
     SSL_CTX_set_keylog_callback(tls,
-                                nullptr);  // the environment could have asked for the keys to be written out
+                                nullptr);  // the environment could enable writing the keys to a file
     return SSL_CTX_set_min_proto_version(tls, TLS1_2_VERSION) == 1 ? trust : nullptr;
 }
 
-// RFC 8446, section 6.2: the alerts that are about the certificate of the other side.
+// RFC 8446, section 6.2: the alerts about the other side's certificate.
 void ServerTrust::noteAlert(int description) noexcept {
     constexpr std::array kOfCertificates{SSL_AD_BAD_CERTIFICATE,     SSL_AD_UNSUPPORTED_CERTIFICATE,
                                          SSL_AD_CERTIFICATE_REVOKED, SSL_AD_CERTIFICATE_EXPIRED,

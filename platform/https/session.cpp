@@ -25,11 +25,11 @@ using foundation::Result;
 
 class SessionTask;
 
-// The tasks that were started and wait for their turn. Shared with the tasks, which may outlive their
+// The started tasks that wait for their turn. Shared with the tasks, which may outlive their
 // session.
 class Inbox {
   public:
-    /// False when the session has gone.
+    /// Returns false if the session no longer exists.
     bool add(std::shared_ptr<SessionTask> task) {
         const std::lock_guard lock(mutex_);
         if (closed_) return false;
@@ -38,7 +38,7 @@ class Inbox {
         return true;
     }
 
-    /// Waits for a task; null once it is closed and empty.
+    /// Waits for a task; null if it is closed and empty.
     std::shared_ptr<SessionTask> take() {
         std::unique_lock lock(mutex_);
         changed_.wait(lock, [this] { return closed_ || !tasks_.empty(); });
@@ -96,7 +96,7 @@ class SessionTask : public Task, public std::enable_shared_from_this<SessionTask
         response_ = response;
     }
 
-    // For the worker alone.
+    // Only for the worker.
     const Request& request() const { return request_; }
     bool isDownload() const { return !completion_; }
     DataCompletion takeCompletion() { return std::move(*completion_); }
@@ -111,16 +111,16 @@ class SessionTask : public Task, public std::enable_shared_from_this<SessionTask
     std::optional<HTTPResponse> response_;
 };
 
-// One worker thread carries out the tasks, one after another. It waits while a callback runs, and uses no
-// object of the transfer or TLS libraries then unless the callback is a challenge: the process may be ended
-// by exit() in any callback, and what those libraries take down at exit must not be in use. A connection that
-// is kept is held, and rests.
+// One worker thread runs the tasks, one after another. It waits while a callback runs. Any callback
+// may end the process by exit(), which frees objects of the transfer and TLS libraries. So the worker
+// uses no such object during a callback, except during a challenge. A kept connection stays open, but
+// idle.
 class NetworkSession : public Session {
   public:
     NetworkSession(SessionDelegate& delegate, trust::TrustService& trust, const SessionOptions& options)
         : delegate_(delegate), trust_(trust), options_(options), worker_([this] { work(); }) {}
 
-    /// Running tasks end with `cancelled`; their callbacks have returned when this does.
+    /// Running tasks end with `cancelled`; the destructor waits for their callbacks.
     ~NetworkSession() override {
         interrupt_.raise();
         inbox_->close();
@@ -137,7 +137,7 @@ class NetworkSession : public Session {
   private:
     void work() {
         const foundation::StackGuard guard;
-        // A connection that the peer has closed must show as a failed write, not end the process.
+        // A write to a closed connection must fail, not end the process.
         sigset_t signals;
         sigemptyset(&signals);
         sigaddset(&signals, SIGPIPE);
@@ -150,7 +150,7 @@ class NetworkSession : public Session {
                 carryOutData(*task);
             task->setState(TaskState::completed);
         }
-        connection_.drop();  // where it was used
+        connection_.drop();  // on the thread that used it
     }
 
     void carryOutData(SessionTask& task) {
@@ -169,7 +169,8 @@ class NetworkSession : public Session {
             }
         }
         callbacks_.sync([&] {
-            // Its captures are the caller's objects: they go where the caller expects to be called.
+            // Its captures are the caller's objects: they are freed on the queue, where the caller expects
+            // calls.
             const DataCompletion completion = task.takeCompletion();
             if (completion) completion(body, response, error);
         });
@@ -180,7 +181,7 @@ class NetworkSession : public Session {
         callbacks_.sync([&] { delegate_.didComplete(*this, task, error); });
     }
 
-    // The file is gone when this returns.
+    // The file is removed when this returns.
     std::optional<Error> download(SessionTask& task) {
         Result<std::unique_ptr<DownloadFile>> file = DownloadFile::create(temporaryDirectory());
         if (!file) return file.error();
@@ -196,7 +197,7 @@ class NetworkSession : public Session {
         return options_.temporaryDirectory ? options_.temporaryDirectory() : foundation::temporaryDirectory();
     }
 
-    // Follows redirects to the answer that is to be had in the end.
+    // Follows redirects to the final response.
     Result<HTTPResponse> fetch(Request request, std::size_t maximumBody, BodySink& sink) {
         const TransferContext context{
             options_, connection_, interrupt_, maximumBody,
@@ -224,7 +225,7 @@ class NetworkSession : public Session {
     trust::TrustService& trust_;
     const SessionOptions options_;
     const std::shared_ptr<Inbox> inbox_ = std::make_shared<Inbox>();
-    ConnectionSlot connection_;  // the worker's alone
+    ConnectionSlot connection_;  // only for the worker
     Interrupt interrupt_;
     foundation::SerialQueue callbacks_{"https-callbacks"};
     std::thread worker_;  // last: it uses all of the above

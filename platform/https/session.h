@@ -1,12 +1,12 @@
 // HTTPS sessions: data and download tasks whose server trust the delegate decides.
 //
-// A session is ephemeral: nothing of it outlives the process, no cookies, cache or credentials are kept. It
-// owns a serial callback queue; the delegate's methods and the completion handlers run there, one at a time,
-// never on the thread that started the task. The tasks of a session are carried out one after another. The
-// process may be ended by exit() in any callback.
+// A session is ephemeral: it keeps no cookies, cache or credentials, and stores nothing. It owns a serial
+// callback queue; the delegate's methods and the completion handlers run there, one at a time, never on the
+// thread that started the task. The tasks of a session run one after another. Any callback may end the
+// process by exit().
 //
-// Destroying a session ends its running tasks with `cancelled`; it returns when their callbacks have. A
-// session must not be destroyed from its own queue.
+// Destroying a session ends its running tasks with `cancelled`, and waits for their callbacks. Never destroy
+// a session from its own queue.
 #pragma once
 
 #include <functional>
@@ -36,7 +36,7 @@ inline constexpr std::string_view kUserAgent = "pinwell/34.0";
 /// Codes of kURLErrorDomain.
 enum class URLErrorCode : std::int64_t {
     cancelled = 1,       // the challenge was cancelled: the server is not trusted
-    unsupportedURL = 2,  // no URL, not https, or a redirect to what is not
+    unsupportedURL = 2,  // no URL, not https, or a redirect to another scheme
     cannotFindHost = 3,
     cannotConnect = 4,
     timedOut = 5,
@@ -48,7 +48,7 @@ enum class URLErrorCode : std::int64_t {
     proxyFailed = 11,
     cannotWriteFile = 12,
     invalidConfiguration = 13,
-    resourceUnavailable = 14,  // no more threads to be had
+    resourceUnavailable = 14,  // no more threads can be started
     unknown = 99,
 };
 
@@ -59,7 +59,7 @@ struct CaseInsensitiveLess {
 };
 using Headers = std::map<std::string, std::string, CaseInsensitiveLess>;
 
-/// A request to be made. Without a URL it does not start.
+/// A request. Without a URL it does not start.
 struct Request {
     std::optional<URL> url;
     std::string method = "GET";
@@ -69,33 +69,33 @@ struct Request {
     void addHeader(std::string_view name, std::string_view value);
 };
 
-/// What came back before the body. Of a redirect chain, the last one's. Fields of one name are joined
-/// with ", ".
+/// The head of a response; after redirects, of the last one. Fields of one name are joined with ",
+/// ".
 struct HTTPResponse {
     URL url;
     int status = 0;
     Headers headers;
 
-    /// Nothing when the response does not have it.
+    /// `nullopt` if the response does not have it.
     std::optional<std::string> header(std::string_view name) const;
 };
 
 /// The platform's text for a status code: "not found" for 404.
 std::string localizedStringForStatusCode(int status);
 
-/// How the server is to be judged.
+/// The kind of a challenge.
 enum class AuthenticationMethod { serverTrust, clientCertificate, password };
 
-/// A question that the connection puts to the delegate.
+/// A question of the connection to the delegate.
 struct AuthenticationChallenge {
-    std::string host;  // as named in the URL being fetched, without port or brackets
+    std::string host;  // as in the URL, without port or brackets
     AuthenticationMethod method = AuthenticationMethod::serverTrust;
     std::shared_ptr<trust::Trust> serverTrust;  // set for the serverTrust method
 };
 
 enum class Disposition { useCredential = 0, performDefaultHandling = 1, cancelChallenge = 2 };
 
-/// Permission to go on with the server that was judged.
+/// Permission to go on with the judged server.
 struct Credential {
     std::shared_ptr<trust::Trust> trust;
 };
@@ -119,7 +119,7 @@ class SessionDelegate {
     /// which is removed when this returns.
     virtual void didFinishDownloading(Session& session, Task& task, const URL& location) = 0;
 
-    /// A download task has ended; without an error, didFinishDownloading has run before.
+    /// A download task has ended; without an error, didFinishDownloading was called before.
     virtual void didComplete(Session& session, Task& task, const std::optional<Error>& error) = 0;
 };
 
@@ -130,19 +130,19 @@ class Task {
   public:
     virtual ~Task() = default;
 
-    /// Starts it. A task whose request has no URL does not start: the state stays what it is not running, the
-    /// completion is not called. Neither does one whose session has gone. A second call does nothing.
+    /// Starts it. A task whose request has no URL, or whose session no longer exists, does not start: its
+    /// state stays the same, and its completion is not called. A second call does nothing.
     virtual void resume() = 0;
 
-    /// `completed` from when the last callback has returned: a failure that comes at once seldom hides
-    /// from who has just started the task that it did start.
+    /// `completed` after the last callback has returned. So after an immediate failure, the caller can
+    /// usually still see that the task started.
     virtual TaskState state() const = 0;
 
-    /// Nothing until the answer is complete, and after an error.
+    /// `nullopt` until the response is complete, and after an error.
     virtual std::optional<HTTPResponse> response() const = 0;
 };
 
-/// Body and response of a data task, or its error; an empty body is there, and empty.
+/// Body and response of a data task, or its error; an empty body is an empty buffer.
 using DataCompletion = std::function<void(const std::optional<Data>&, const std::optional<HTTPResponse>&,
                                           const std::optional<Error>&)>;
 
@@ -157,8 +157,8 @@ class SessionService {
   public:
     virtual ~SessionService() = default;
 
-    /// The delegate must outlive the session. A session has threads of its own: an error of
-    /// `resourceUnavailable` where the user or the container may not have them.
+    /// The delegate must outlive the session. A session has its own threads: the error is
+    /// `resourceUnavailable` if the user or the container may not start them.
     virtual foundation::Result<std::shared_ptr<Session>> ephemeralSession(SessionDelegate& delegate) = 0;
 };
 

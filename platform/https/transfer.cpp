@@ -25,7 +25,7 @@ using foundation::Result;
 using EasyHandle = foundation::Handle<CURL, curl_easy_cleanup>;
 using HeaderListHandle = foundation::Handle<curl_slist, curl_slist_free_all>;
 
-// Not before the first transfer: it costs start-up time, and most runs that fail never get here.
+// Called at the first transfer, because it costs start-up time, and most failed runs never get here.
 bool libraryIsReady() {
     static const bool ready = curl_global_init(CURL_GLOBAL_DEFAULT) == CURLE_OK;
     return ready;
@@ -46,7 +46,7 @@ HeaderListHandle headerList(const Request& request) {
         list.reset(longer);
     };
     for (const auto& [name, value] : request.headers) add(value.empty() ? name + ";" : name + ": " + value);
-    // What the library would add of its own accord.
+    // Fields that the library would add by itself.
     for (const char* name : {"Content-Type", "Expect"})
         if (!request.headers.contains(std::string_view(name))) add(std::string(name) + ":");
     return list;
@@ -121,11 +121,11 @@ class Exchange {
         set(CURLOPT_NOSIGNAL, 1L);
         set(CURLOPT_MAXAGE_CONN, static_cast<long>(context_.options.keepsIdleConnectionFor.count()));
         set(CURLOPT_MAXLIFETIME_CONN, static_cast<long>(context_.options.keepsConnectionFor.count()));
-        set(CURLOPT_QUICK_EXIT, 1L);  // a name server that is silent must not hold up the end of a task
+        set(CURLOPT_QUICK_EXIT, 1L);  // a silent name server must not delay the end of a task
         set(CURLOPT_ERRORBUFFER, errorText_.data());
     }
 
-    // The library's own checks stay switched on without any anchors: should our callback not be asked, the
+    // The library's own checks stay enabled, without any anchors: if our callback is not called, the
     // connection is refused. The host name is part of the policy that our callback's judge applies.
     void configureTrust() {
         set(CURLOPT_SSLVERSION, long{CURL_SSLVERSION_TLSv1_2});
@@ -139,15 +139,16 @@ class Exchange {
         set(CURLOPT_SSL_CTX_DATA, this);
         set(CURLOPT_PREREQFUNCTION, &Exchange::onConnected);
         set(CURLOPT_PREREQDATA, this);
-        // A proxy's certificate would be judged under the wrong host. The library alone knows whether the
-        // environment's proxy applies to this host, so it is left to choose one, and to fail there by itself.
+        // A proxy's certificate would be judged for the wrong host. Only the library knows whether the
+        // environment's proxy applies to this host, so the library chooses one, and fails by itself on an
+        // https proxy.
         set(CURLOPT_PROXY_SSL_CIPHER_LIST, "no-cipher");
     }
 
     void configureRequest() {
         set(CURLOPT_USERAGENT, std::string(kUserAgent).c_str());
         set(CURLOPT_HTTPHEADER, headers_.get());
-        set(CURLOPT_HEADEROPT, long{CURLHEADER_SEPARATE});  // a proxy gets none of them
+        set(CURLOPT_HEADEROPT, long{CURLHEADER_SEPARATE});  // not sent to a proxy
         if (request_.method == "HEAD") {
             set(CURLOPT_NOBODY, 1L);
             return;
@@ -155,7 +156,7 @@ class Exchange {
         if (!request_.body.empty() || request_.method == "POST" || request_.method == "PUT") {
             set(CURLOPT_POST, 1L);
             set(CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(request_.body.size()));
-            // Never null: that would mean a body that is read elsewhere.
+            // Never null: null would mean that the body comes from a callback.
             set(CURLOPT_POSTFIELDS, request_.body.empty() ? static_cast<const void*>("")
                                                           : static_cast<const void*>(request_.body.data()));
         }
@@ -224,8 +225,8 @@ class Exchange {
         return answer;
     }
 
-    // Whoever can cut a connection could shorten a body whose end nothing else tells (RFC 9112, section 6.3),
-    // and older releases of the library take any end for one. HTTP/2 has an end of its own.
+    // If only the connection's end ends a body (RFC 9112, section 6.3), an attacker can shorten it by cutting
+    // the connection, and older releases of the library accept any end. HTTP/2 marks the end itself.
     void failWhereCut(CURLcode result) {
         const bool endSeen = agreedOnHTTP2() || (trust() != nullptr && trust()->sawOrderlyEnd());
         const bool cut = head_.hasOpenEnd(request_.method) && !endSeen;
@@ -236,7 +237,7 @@ class Exchange {
             fail(URLErrorCode::badServerResponse, "the answer is not as long as it says");
     }
 
-    // The first failure is the cause; what the library reports after it is a consequence.
+    // The first failure is the cause; later reports of the library are consequences.
     void fail(URLErrorCode code, const std::string& reason) {
         if (!failure_) failure_ = makeError(code, target_.text() + ": " + reason + ".");
     }
@@ -268,12 +269,12 @@ class Exchange {
 
     bool judge(const std::vector<Data>& certificates) {
         std::optional<Error> refusal = context_.judge(target_.host, certificates);
-        lastActivity_ = context_.options.now();  // the time that the judge took is not the server's
+        lastActivity_ = context_.options.now();  // the judge's time does not count as the server's
         if (refusal && !failure_) failure_ = std::move(refusal);
         return !failure_;
     }
 
-    // The library's callbacks are called from C: nothing may be thrown out of them.
+    // The library's callbacks are called from C: no exception may leave them.
     template <class Work>
     bool guarded(Work work) noexcept {
         try {
@@ -321,12 +322,12 @@ class Exchange {
     }
 
     void checkHead() {
-        // The library believes a status line that speaks of HTTP/2 whatever was agreed on, and reads a body
-        // by other rules then.
+        // The library accepts a status line of HTTP/2 even if HTTP/1 was agreed on, and then reads the body
+        // by other rules.
         if (head_.isHTTP1() == agreedOnHTTP2())
             fail(URLErrorCode::badServerResponse, "the answer is not of the HTTP version agreed on");
-        // It takes the last of several lengths, the digits that a malformed one begins with, and unpacks a
-        // transfer whose compression nobody asked for, however much that makes of it.
+        // The library uses the last of several lengths, and the leading digits of a malformed one. It also
+        // unpacks a compressed transfer that was not requested, to any size.
         if (!head_.hasPlainFraming())
             fail(URLErrorCode::badServerResponse, "where the answer ends is not said in one plain way");
         else if (head_.bodyLength(request_.method).value_or(0) > context_.maximumBody)
@@ -388,7 +389,7 @@ class Exchange {
     CURLcode setupResult_ = CURLE_OK;
     Clock::time_point lastActivity_;
     std::size_t received_ = 0;  // of the body
-    std::size_t bytesUsed_;     // of those that arrived, when the last line or piece of the body came of them
+    std::size_t bytesUsed_;     // of the arrived bytes, at the last complete line or piece of the body
     curl_off_t uploaded_ = 0;
     EasyHandle easy_{curl_easy_init()};  // last: it uses all of the above until it is gone
 };

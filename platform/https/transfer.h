@@ -1,8 +1,8 @@
-// One HTTPS exchange: a request, and the answer of that very URL. Redirects are the caller's to follow.
+// One HTTPS exchange: a request, and the response of that URL. The caller follows redirects.
 //
-// A server is judged once a connection, in the handshake: every exchange, unless the session keeps its
-// connection for the next one. Nothing is taken from the environment but the proxy (https_proxy, all_proxy,
-// no_proxy); no cookies, no credentials, no cache.
+// A server is judged once for each connection, in the handshake. Each exchange makes a connection, unless the
+// session keeps one. Only the proxy comes from the environment (https_proxy, all_proxy, no_proxy); no
+// cookies, no credentials, no cache.
 #pragma once
 
 #include <functional>
@@ -23,17 +23,17 @@ struct TransferContext {
     const Interrupt& interrupt;  // ends the exchange with `cancelled`
     std::size_t maximumBody;
 
-    /// Judges the server of that host by the certificates it sent, the leaf first: nothing, or why it is
+    /// Judges the server of that host by its certificates, the leaf first: returns `nullopt`, or why it is
     /// refused.
     std::function<std::optional<Error>(const std::string& host, const std::vector<Data>& certificates)> judge;
 };
 
 struct TransferAnswer {
     HTTPResponse response;
-    std::optional<std::string> redirectTarget;  // of a redirect: its Location, made absolute
+    std::optional<std::string> redirectTarget;  // for a redirect: its Location, as an absolute URL
 };
 
-/// Blocks until the answer is complete or has failed. The body of a redirect is dropped, any other goes to
+/// Blocks until the response is complete or has failed. The body of a redirect is dropped; any other goes to
 /// `sink`. A URL that is not https, or that names a user, is refused before anything is sent. The calling
 /// thread must have SIGPIPE blocked.
 foundation::Result<TransferAnswer> transfer(const Request& request, const TransferContext& context,

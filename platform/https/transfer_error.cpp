@@ -15,9 +15,9 @@ constexpr TransferFailure kUnknown{CURLE_OK, Code::unknown, "the transfer failed
 // CURLE_TOO_LARGE, which headers before 8.6 do not have.
 constexpr int kTooLarge = 100;
 
-// Results that cannot come from an https exchange as we make it are left to kUnknown.
+// Results that our https exchanges cannot have map to kUnknown.
 constexpr std::array kFailures{
-    // Of the answer: the URL's scheme has been looked at before.
+    // About the response: the URL's scheme was checked before.
     TransferFailure{CURLE_UNSUPPORTED_PROTOCOL, Code::badServerResponse, "the answer is not HTTP"},
     TransferFailure{CURLE_URL_MALFORMAT, Code::unsupportedURL, "the URL is malformed"},
     TransferFailure{CURLE_LOGIN_DENIED, Code::unsupportedURL, "the URL holds a user name"},
@@ -25,12 +25,12 @@ constexpr std::array kFailures{
                     "the transfer library lacks what is needed"},
     TransferFailure{CURLE_UNKNOWN_OPTION, Code::invalidConfiguration,
                     "the transfer library lacks what is needed"},
-    // A field without a colon; the request's own were looked at before.
+    // A field without a colon; the request's own fields were checked before.
     TransferFailure{CURLE_BAD_FUNCTION_ARGUMENT, Code::badServerResponse, "the answer's header is malformed"},
     TransferFailure{CURLE_COULDNT_RESOLVE_HOST, Code::cannotFindHost, "the host name could not be resolved"},
     TransferFailure{CURLE_COULDNT_RESOLVE_PROXY, Code::proxyFailed, "the proxy's name could not be resolved"},
     TransferFailure{CURLE_PROXY, Code::proxyFailed, "the proxy refused"},
-    // The one cipher list that is ever set is the empty one for https proxies.
+    // The only cipher list that is ever set is the empty one for https proxies.
     TransferFailure{CURLE_SSL_CIPHER, Code::proxyFailed,
                     "a proxy that is itself reached by https is not used"},
     TransferFailure{CURLE_COULDNT_CONNECT, Code::cannotConnect, "the connection could not be made"},
@@ -47,7 +47,7 @@ constexpr std::array kFailures{
     TransferFailure{CURLE_PARTIAL_FILE, Code::connectionLost, "the connection was closed within the answer"},
     TransferFailure{CURLE_SEND_ERROR, Code::connectionLost, "the connection was lost while sending"},
     TransferFailure{CURLE_RECV_ERROR, Code::connectionLost, "the connection was lost while receiving"},
-    // What the library says to a header line that is longer than its own limit, before and since 8.6.
+    // The library's results for a header line beyond its own limit, before and since 8.6.
     TransferFailure{CURLE_OUT_OF_MEMORY, Code::tooLarge, "the answer is larger than can be kept"},
     TransferFailure{kTooLarge, Code::tooLarge, "the answer is larger than can be kept"},
 };

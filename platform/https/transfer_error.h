@@ -7,17 +7,17 @@
 
 namespace pinwell::https {
 
-/// An error of kURLErrorDomain. The text becomes one line that is safe on a terminal.
+/// An error of kURLErrorDomain. The text becomes one line, safe for a terminal.
 Error makeError(URLErrorCode code, const std::string& text);
 
 /// Our code and words for a libcurl result (a CURLcode).
 struct TransferFailure {
     int result;
     URLErrorCode code;
-    std::string_view reason;  // goes behind "HOST port N: "
+    std::string_view reason;  // goes after "HOST port N: "
 };
 
-/// Of a result that is not in the table: unknown.
+/// For a result outside the table: unknown.
 const TransferFailure& failureOf(int result) noexcept;
 
 }  // namespace pinwell::https

@@ -51,7 +51,7 @@ Result<Target> targetOf(const foundation::URL& url) {
     target.port = partOf(target.address.get(), CURLUPART_PORT, CURLU_DEFAULT_PORT);
     if (target.host.starts_with('[') && target.host.ends_with(']'))
         target.host = target.host.substr(1, target.host.size() - 2);
-    // The name that is judged must be the one that is connected to, however oddly it is written.
+    // The judged name must be the name of the connection, in any spelling.
     const CaseInsensitiveLess less;
     if (less(target.host, url.host()) || less(url.host(), target.host))
         return refuse("has an ambiguous host");

@@ -1,4 +1,4 @@
-// The URL of an exchange as the transfer library understands it.
+// The URL of an exchange, for the transfer library.
 #pragma once
 
 #include <memory>
@@ -24,8 +24,8 @@ struct Target {
     std::string text() const { return host + " port " + port; }
 };
 
-/// An error of `unsupportedURL` when the URL is not https, names a user, or names a host that the library
-/// would read as another one.
+/// Returns an error of `unsupportedURL` if the URL is not https, names a user, or names a host that the
+/// library would read as another host.
 foundation::Result<Target> targetOf(const foundation::URL& url);
 
 }  // namespace pinwell::https
