@@ -1,11 +1,11 @@
-# What the benchmarks share. Sets $bin (the optimised programs) and $compare, makes a directory $work, and
-# takes away at the end what a benchmark has started and written.
+# Shared code of the benchmarks. Sets $bin (the optimised programs) and $compare, and makes a directory $work. At the end it
+# ends the started programs and removes the written files.
 #
 #   build TARGET...    builds the programs, optimised
 #   start_service      starts a record service and points PINWELL_PLATFORM at it; sets $url
 #   forget FILE        drops the file from the page cache
 #
-# shellcheck disable=SC2034  # what it sets, those that source it use
+# shellcheck disable=SC2034  # the sourcing scripts use these variables
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.."
 bin=$PWD/build/release/bin

@@ -1,11 +1,11 @@
-// Times two commands against each other in one run:
+// Compares the times of two commands in one run:
 //   compare_commands [--memory MEBIBYTES] [--time MILLISECONDS] RUNS LIMIT COMMAND... -- PEER...
 //
-// The two are run by turns, so that whatever else the machine does weighs on both alike. Prints the median
-// wall time of each, their ratio, the fastest run of each, which says more on a busy machine, and the most
-// memory that a run of each had. Exits with 1 when the ratio of the medians is above LIMIT ("inf" for none),
-// COMMAND had more memory than MEBIBYTES, or its median is above MILLISECONDS, 0 otherwise, and with 70 when
-// a command could not be run or ended otherwise than its first run did.
+// Runs the two commands in turn, so that other load on the machine affects both alike. Prints the median wall
+// time of each, their ratio, the fastest run of each (more reliable on a busy machine), and the highest
+// memory of a run of each. Exits with 1 if the ratio of the medians is above LIMIT ("inf" for none), COMMAND
+// had more memory than MEBIBYTES, or its median is above MILLISECONDS. Exits with 70 if a command could not
+// be run or ended unlike its first run, else with 0.
 #include <fcntl.h>
 #include <spawn.h>
 #include <sys/resource.h>

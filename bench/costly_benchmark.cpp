@@ -1,9 +1,9 @@
-// What every costly input of the tests (tests/costly/) takes at full length, in absolute numbers:
+// Measures every costly input of the tests (tests/costly/) at full length, in absolute numbers:
 //   costly_benchmark [--length MEBIBYTES] [--list] [NAME...]
 //
-// Prints a line for each row: its length, processor time and memory, what became of it, and its control's
-// time. A name chooses the rows that begin with it. Exits with 1 when a row takes more than two seconds of
-// processor time or 256 MiB.
+// Prints a line for each row: its length, processor time, memory and outcome, and its control's time. A name
+// selects the rows that begin with it. Exits with 1 if a row takes more than two seconds of processor time or
+// 256 MiB.
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>

@@ -1,15 +1,15 @@
 // Artefacts for the benchmarks:
 //
-//   sample_artefact image|package FILE    turns a file of any contents and size into a signed artefact
+//   sample_artefact image|package FILE    turns any file of any size into a signed artefact
 //   sample_artefact paged-image FILE      the same, with a hash for every page of an image
 //   sample_artefact bundle DIRECTORY FILES BYTES
 //                                         writes a bundle with that many sealed files of that many bytes
 //   sample_artefact images DIRECTORY COUNT
-//                                         writes small images without a signature; no two have the same hash,
-//                                         nor do those of another count
+//                                         writes small unsigned images with different hashes, which also
+//                                         differ from the images of another COUNT
 //
-// A signature and a trailer are put behind the contents of an image, an archive's header and table of
-// contents over the beginning of a package. All else in the file is left as it lies on the disk.
+// For an image, a signature and a trailer follow the contents. For a package, an archive's header and table
+// of contents replace the beginning. The rest of the file stays unchanged on the disk.
 #include <cstdio>
 #include <exception>
 #include <filesystem>
@@ -44,7 +44,7 @@ void writeAt(std::uint64_t offset, const Data& bytes, const char* path) {
     file.close();
 }
 
-/// Holds the image in memory: nothing is measured here.
+/// Holds the image in memory: this program is not measured.
 void signPages(const char* path) {
     const Data contents = pinwell::foundation::toData(pinwell::test::readFile(path));
     constexpr std::uint32_t kTrailerSlot = 6;

@@ -1,4 +1,4 @@
-# Every library from outside, found in one place. ARCHITECTURE.md says what each is for.
+# Finds every library from outside. ARCHITECTURE.md gives the purpose of each.
 find_package(Threads REQUIRED)
 find_package(PkgConfig REQUIRED)
 find_package(OpenSSL 3.0 REQUIRED)
@@ -11,7 +11,7 @@ find_package(ZLIB REQUIRED)
 pkg_check_modules(RE2 REQUIRED IMPORTED_TARGET re2)
 pkg_check_modules(SECCOMP REQUIRED IMPORTED_TARGET libseccomp>=2.5)
 
-# Single companions alone.
+# For some companions only.
 if(PINWELL_GATE OR PINWELL_LUMORA)
   find_path(TOMLPLUSPLUS_INCLUDE_DIR toml++/toml.h REQUIRED)  # a header
 endif()
@@ -34,7 +34,7 @@ if(PINWELL_LUMORA)
   if(PINWELL_LUMORA_POSTGRESQL AND LIBPQ_FOUND)
     set(PINWELL_HAS_POSTGRESQL ON)
   endif()
-  # On wherever the library is there; asked for by name, it must be.
+  # Enabled if the library is installed; if enabled explicitly, the library is required.
   pkg_check_modules(P11KIT QUIET IMPORTED_TARGET p11-kit-1>=0.24)
   option(PINWELL_LUMORA_PKCS11 "Let lumora-local sign with keys in PKCS #11 tokens (p11-kit)" ${P11KIT_FOUND})
   if(PINWELL_LUMORA_PKCS11 AND NOT P11KIT_FOUND)

@@ -1,5 +1,5 @@
-# What a tool that reads hostile files is built with. The sanitizers bring their own checks, and
-# _FORTIFY_SOURCE hides some of theirs, so the two are not mixed.
+# Hardening for programs that read hostile files. The sanitizers have their own checks, and _FORTIFY_SOURCE hides some
+# of these, so a sanitized build is not hardened.
 add_library(pinwell_hardening INTERFACE)
 if(NOT PINWELL_SANITIZE)
   target_compile_options(pinwell_hardening INTERFACE

@@ -1,4 +1,4 @@
-# The three kinds of target in this tree, each built alike everywhere.
+# The three kinds of target in this tree. All targets of a kind are built in the same way.
 
 # pinwell_library(NAME SOURCES...): the static library of one folder. Its headers are included as
 # "folder/header.h" from the folder above, which keeps every dependency visible in the source.
@@ -14,12 +14,13 @@ function(pinwell_executable name)
   target_link_libraries(${name} PRIVATE pinwell_warnings pinwell_hardening pinwell_sanitizers)
 endfunction()
 
-# pinwell_test(NAME [WHOLE] [SHARDS COUNT] [SLOW] [THREADS] [TIMEOUT SECONDS] SOURCES...): a GoogleTest program; every test in it is
-# a ctest of its own, or, with WHOLE, the program is one: for tables of many quick rows. PINWELL_WHOLE_TESTS makes all of
-# a folder so. SHARDS splits a whole program into that many, which run side by side.
-# SLOW gives its tests the label "slow": they are left out after an edit (scripts/test), and run for a release.
-# THREADS gives a whole program the label "threads", and makes the target "threaded_tests" build it: what it tests runs in
-# several threads, and is run under ThreadSanitizer.
+# pinwell_test(NAME [WHOLE] [SHARDS COUNT] [SLOW] [THREADS] [TIMEOUT SECONDS] SOURCES...): a GoogleTest program.
+# Every test in it is a test of ctest. With WHOLE the program is one test: for tables of many quick rows.
+# PINWELL_WHOLE_TESTS does the same for a folder. SHARDS splits a whole program into this number of parts, which run
+# side by side.
+# SLOW gives its tests the label "slow": scripts/test leaves them out after an edit, and runs them for a release.
+# THREADS gives a whole program the label "threads", and adds it to the target "threaded_tests": the tested code uses
+# several threads, and ThreadSanitizer runs it.
 function(pinwell_test name)
   cmake_parse_arguments(PARSE_ARGV 1 test "WHOLE;SLOW;THREADS" "TIMEOUT;SHARDS" "")
   if(PINWELL_WHOLE_TESTS OR test_SHARDS)
@@ -61,7 +62,7 @@ function(pinwell_test name)
     add_test(NAME ${name} COMMAND ${name})
     set_tests_properties(${name} PROPERTIES ${properties} LABELS "${labels}")
   else()
-    # By the names of parameters: their values may be long, or hold bytes that differ from run to run.
+    # By the names of parameters: their values may be long, or contain bytes that differ from run to run.
     gtest_discover_tests(${name} NO_PRETTY_VALUES DISCOVERY_MODE PRE_TEST PROPERTIES ${properties}
       LABELS "${labels}")
   endif()

@@ -1,4 +1,4 @@
-# PINWELL_SANITIZE names what -fsanitize= takes; empty builds without.
+# PINWELL_SANITIZE is the value of -fsanitize=; empty builds without sanitizers.
 add_library(pinwell_sanitizers INTERFACE)
 if(PINWELL_SANITIZE)
   target_compile_options(pinwell_sanitizers INTERFACE

@@ -18,7 +18,7 @@ struct FreeMemory {
     void operator()(void* memory) const noexcept { std::free(memory); }
 };
 
-/// The checksum of the table of contents of an archive that was opened.
+/// The checksum of the table of contents of an opened archive.
 Data computedChecksum(ByteView archive) {
     const auto header = xar::parseHeader(archive.first(std::min(archive.size(), xar::kLongestHeaderRead)));
     require(header.has_value(), "an archive has a header");

@@ -1,4 +1,4 @@
-// The superblob of a disk image, taken apart to be put together again.
+// The superblob of a disk image, split into its blobs and written again.
 #include <algorithm>
 
 #include "codesign/code_signing.h"

@@ -1,8 +1,8 @@
-// The C interface, as a program that got a file from somebody calls it: every function, on an artefact one
-// file of which is the input, and on handles that were freed.
+// The C interface, as a program calls it with a received file: every function, on an artefact with the input
+// as one of its files, and on freed handles.
 //
-// The first byte of the input says which file that is; the rest are its bytes. Or it says that the rest are
-// certificates, or a hash.
+// The first byte of the input selects the file; the rest is its contents. Some values of this byte mean that
+// the rest is certificates, or a hash.
 #include <pinwell/ticket_c.h>
 #include <sys/stat.h>
 
@@ -18,7 +18,7 @@
 namespace pinwell::fuzz {
 namespace {
 
-/// A file that the input takes the place of, and the artefact that it belongs to.
+/// A file that the input replaces, and its artefact.
 struct Place {
     const char* artefact;
     const char* file;
@@ -162,7 +162,7 @@ void examineRecordName(ByteView input) {
                 "a name has all of the hash");
 }
 
-/// Puts the input in a file's place, and back what was there.
+/// Replaces a file by the input, and restores its contents.
 class Replaced {
   public:
     Replaced(std::string path, const std::string& contents) : path_(std::move(path)) {

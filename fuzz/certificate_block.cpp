@@ -1,5 +1,5 @@
 // The certificate block of a ticket: a SEQUENCE of certificates, read, chained and judged by the real trust
-// service, to which no anchor is known.
+// service, which has no anchors.
 #include <memory>
 
 #include "src/satchel_internal.h"
@@ -18,7 +18,7 @@ std::unique_ptr<trust::TrustService> serviceWithoutAnchors() {
         [] { return foundation::Date{1795204500}; });
 }
 
-// How many elements there are end to end, and whether they fill the bytes.
+// The number of consecutive elements, and whether they fill the bytes.
 std::pair<std::size_t, bool> elementsIn(ByteView bytes) {
     std::size_t count = 0;
     for (; !bytes.empty(); ++count) {

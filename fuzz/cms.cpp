@@ -1,5 +1,5 @@
-// A signer's CMS message and the time-stamp token in it. The input is a byte that says how long the signed
-// content is, the content, and the message.
+// A signer's CMS message and the time-stamp token in it. The input is a byte with the length of the signed
+// content, the content, and the message.
 #include "codesign/cms_signature.h"
 #include "codesign/code_error.h"
 #include "foundation/byte_reader.h"

@@ -1,4 +1,4 @@
-// A signature: the superblob, its code directories and components, and what they come to.
+// A signature: the superblob, its code directories and components, and the result of judging them.
 #include "codesign/code_signature.h"
 
 #include <algorithm>

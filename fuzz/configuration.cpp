@@ -1,5 +1,5 @@
-// What the user and the system configure: the platform directory's settings and root certificates, and a
-// domain of user defaults. The input is all three at once.
+// The configuration by user and system: the platform directory's settings and root certificates, and a domain
+// of user defaults. The input is all three at once.
 #include <algorithm>
 #include <cstdlib>
 

@@ -1,5 +1,5 @@
-// A disk image: its trailer and superblob, as the tool and as the code-signing service read them, and a
-// ticket stapled to it.
+// A disk image: its trailer and superblob, read by the tool and by the code-signing service, and a ticket
+// stapled to it.
 #include <algorithm>
 #include <filesystem>
 

@@ -1,4 +1,4 @@
-// An executable image, thin or universal, as far as the signatures of its slices.
+// An executable image, thin or universal, up to the signatures of its slices.
 #include "codesign/executable_image.h"
 
 #include <algorithm>

@@ -1,5 +1,5 @@
-// The record service's answer to a lookup, from its JSON to the ticket in it: in a run of `validate` and one
-// of `staple`, on a platform that takes any certificate and signature for good.
+// The record service's response to a lookup, from its JSON to the ticket in it: in a run of `validate` and
+// one of `staple`, on a platform that accepts any certificate and signature.
 #include <algorithm>
 #include <array>
 #include <filesystem>
@@ -18,7 +18,7 @@ bool isAnOutcome(int status) {
     return std::ranges::find(kOutcomes, status) != kOutcomes.end();
 }
 
-// What the run ends with; nothing when it goes on to a download.
+// The exit code of the run; `nullopt` if it continues with a download.
 std::optional<int> finish(ControllerRun& run, std::uint8_t operation, ByteView answer) {
     run.controller.setOperation(operation);
     require(run.controller.grabTicket(), "the lookup is under way");

@@ -1,5 +1,5 @@
-// Writes the seeds of every fuzz target, from the builders that the tests use: one directory a target, one
-// file a seed, named after what it holds.
+// Writes the seeds of every fuzz target, from the tests' builders: one directory for each target, one file
+// for each seed, named after its contents.
 //
 //   make_corpus DIRECTORY
 #include <cstdio>
@@ -206,8 +206,8 @@ void makeArchives(const std::string& corpus) {
         .add("record", makeTrailer({}));
 }
 
-// A dictionary of one key, whose value is an array of an integer, a boolean, a real, a date, text in UTF-16,
-// and text whose length follows.
+// A dictionary of one key. Its value is an array of an integer, a boolean, a real, a date, text in UTF-16,
+// and text with a separate length.
 Data binaryPropertyList() {
     const std::vector<std::string> objects = {"\xD1\x01\x02",
                                               "\x51\x61",
@@ -288,7 +288,7 @@ void makeSignedExecutables(const std::string& corpus) {
         .add("universal", UniversalImageBuilder().slice(kSampleX86, intel).slice(kSampleArm, adHoc).build());
 }
 
-/// The first byte says what the rest is (fuzz/verify_disk_image.cpp).
+/// The first byte gives the kind of the rest (fuzz/verify_disk_image.cpp).
 void makeVerifiedDiskImages(const std::string& corpus) {
     const std::string artefacts = VECTORS_DIRECTORY "/artefacts/";
     Seeds seeds(corpus, "verify_disk_image");
@@ -313,7 +313,7 @@ void makeVerifiedDiskImages(const std::string& corpus) {
         .add("table_shared", table(TabledImageBuilder().plain(some).again(4, 2048)));
 }
 
-/// The first byte says what the rest is (fuzz/verify_package.cpp).
+/// The first byte gives the kind of the rest (fuzz/verify_package.cpp).
 void makeVerifiedPackages(const std::string& corpus) {
     const std::string artefacts = VECTORS_DIRECTORY "/artefacts/";
     const auto file = [](const std::string& name, const std::string& inside) {
@@ -361,7 +361,7 @@ void makeSeals(const std::string& corpus) {
              "designated => identifier com.example.a and (cdhash H\"ABab\" or !(anchor trusted and never))");
 }
 
-/// The first byte says which file of an artefact the rest is (fuzz/c_interface.cpp).
+/// The first byte selects the file of an artefact that the rest replaces (fuzz/c_interface.cpp).
 void makeFilesOfArtefacts(const std::string& corpus) {
     const std::string artefacts = VECTORS_DIRECTORY "/artefacts/";
     Seeds seeds(corpus, "c_interface");

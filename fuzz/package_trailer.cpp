@@ -1,4 +1,4 @@
-// The trailers behind a package's archive: found, and a ticket stapled among them.
+// The trailers after a package's archive: found, and a ticket stapled among them.
 #include "src/PWHashedFile/package_trailer.h"
 
 #include <algorithm>
@@ -11,8 +11,8 @@
 namespace pinwell::fuzz {
 namespace {
 
-// How much of the file stays where it is when a ticket is written. With trailers but without a ticket nothing
-// does: the tool is known to begin such a file anew.
+// How much of the file a new ticket leaves in place. With trailers but without a ticket it is nothing: the
+// tool then writes from the file's beginning.
 std::size_t keptLength(const PWHashedFlatPackage& package) {
     if (package.ticketStart() != 0) return package.ticketStart();
     return package.hasTrailers() ? 0 : package.origEOL();

@@ -13,11 +13,11 @@ namespace {
 
 using foundation::Value;
 
-// Values, and levels of them.
+// The number of values, and of levels.
 struct Extent {
     std::size_t values = 0;
     unsigned depth = 0;
-    bool hasReals = false;  // which are written in fewer digits than they have
+    bool hasReals = false;  // they are written with fewer digits than they have
 };
 
 void measure(const Value& value, unsigned depth, Extent& extent) {

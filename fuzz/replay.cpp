@@ -1,6 +1,6 @@
-// Runs a target over files, and over all files below directories, in the place of the fuzzer: any compiler
-// will do. A directory that does not exist holds nothing; to have been given no input at all is a failure,
-// and so is an input that takes as much processor time as the fuzzer would call a hang.
+// Runs a target over files, and over all files below directories, instead of the fuzzer. Any compiler works.
+// A missing directory counts as empty. A run without any input fails, and so does an input that takes so much
+// processor time that the fuzzer would report a hang.
 #include <cstdint>
 #include <cstdio>
 #include <ctime>
@@ -18,7 +18,7 @@ namespace {
 
 namespace fs = std::filesystem;
 
-/// Of processor time, for one input. The slowest takes a fraction of a second under a sanitizer.
+/// Processor time for one input. The slowest takes a fraction of a second under a sanitizer.
 constexpr std::clock_t kMaximumSeconds = 20;
 
 std::vector<fs::path> filesAt(const fs::path& place) {
@@ -33,7 +33,7 @@ void replay(const fs::path& path) {
     std::ifstream file(path, std::ios::binary);
     const std::string contents{std::istreambuf_iterator<char>(file), {}};
     const std::vector<std::uint8_t> bytes(contents.begin(), contents.end());
-    // What an input does is seen on standard error; this says which one it was.
+    // Standard error shows the effects of an input; this line names the input.
     std::fprintf(stderr, "%s\n", path.c_str());
     const std::clock_t before = std::clock();
     LLVMFuzzerTestOneInput(bytes.data(), bytes.size());

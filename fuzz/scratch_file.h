@@ -1,4 +1,4 @@
-// The input in a file, for what reads files alone.
+// The input as a file, for code that reads only files.
 #pragma once
 
 #include <string>
@@ -8,7 +8,7 @@
 
 namespace pinwell::fuzz {
 
-/// A regular file in memory that has no name but its descriptor's, which is a symbolic link.
+/// A regular file in memory. Its only name is a symbolic link, the one of its descriptor.
 class ScratchFile {
   public:
     explicit ScratchFile(ByteView contents);

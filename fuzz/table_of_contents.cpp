@@ -1,5 +1,5 @@
-// The document inside a package archive: by itself, where neither compression nor checksum is in the fuzzer's
-// way, and as an archive made around it.
+// The document inside a package archive: by itself, so that neither compression nor checksum stops the
+// fuzzer, and in an archive that is made around it.
 #include "xar/table_of_contents.h"
 
 #include <algorithm>

@@ -1,4 +1,4 @@
-// The way from the fuzzer, or from the driver that replays inputs without one, into a target.
+// Passes the input to a target, from the fuzzer or from the driver that replays inputs.
 #include "target.h"
 
 #include <fcntl.h>
@@ -16,8 +16,8 @@
 namespace pinwell::fuzz {
 namespace {
 
-// Has the fuzzer come to an orderly end after that much processor time, which its own limit, on elapsed time,
-// cannot give on a machine that has other work.
+// Lets the fuzzer end in order after this processor time. Its own limit counts elapsed time, which is no
+// measure on a busy machine.
 void limitProcessorTime(long seconds) {
     struct sigaction action {};
     action.sa_handler = [](int) { raise(SIGUSR1); };

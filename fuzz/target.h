@@ -1,8 +1,8 @@
-// What every fuzz target is made of: one function that is given the input, and claims about what comes of it.
+// The parts of every fuzz target: one function for the input, and claims about the result.
 //
-// A target does more than to survive its input. What it claims is checked with require(), which ends the
-// process, so that the fuzzer keeps the input as it keeps that of a crash. A target keeps nothing from one
-// input to the next that could change what becomes of it.
+// A target checks more than survival. require() checks its claims and ends the process if one is false, so
+// that the fuzzer keeps the input like that of a crash. A target keeps nothing between inputs that could
+// change a result.
 #pragma once
 
 #include "foundation/bytes.h"
@@ -12,13 +12,13 @@ namespace pinwell::fuzz {
 using foundation::ByteView;
 using foundation::Data;
 
-/// The target: one a program, defined in the file that bears its name.
+/// The target: one for each program, defined in the file of its name.
 void examine(ByteView input);
 
-/// Ends the process with a line that states the claim, unless it holds.
+/// If the claim does not hold, ends the process with a line that states it.
 void require(bool holds, const char* claim);
 
-/// From now on messages are made up in full, verbose ones included, and go nowhere.
+/// After this call, all messages are formatted, also the verbose ones, and dropped.
 void discardMessages();
 
 }  // namespace pinwell::fuzz

@@ -1,4 +1,4 @@
-// A ticket container and the payload in it; the input is the container. A payload by itself is read as well.
+// A ticket container and its payload; the input is the container. A payload by itself is read as well.
 #include <algorithm>
 
 #include "foundation/byte_writer.h"
@@ -10,11 +10,11 @@
 namespace pinwell::fuzz {
 namespace {
 
-// The payload that this ticket was decoded from, entries apart.
+// The payload of this decoded ticket, without the entries.
 Data encodedHeader(const tm_ticket* ticket, ByteView payload) {
     foundation::ByteWriter writer;
     writer.text(kTicketMagic).le16(tm_ticket_get_version(ticket));
-    writer.bytes(payload.subspan(6, 2));  // the hash length, which nothing but the entries tells
+    writer.bytes(payload.subspan(6, 2));  // the hash length, which only the entries contain
     writer.le32(tm_ticket_get_cdhash_count(ticket)).le32(tm_ticket_get_flags(ticket));
     return writer.le64(tm_ticket_get_signature_time(ticket)).data();
 }

@@ -15,7 +15,7 @@ using verify::Outcome;
 using verify::Section;
 using verify::VerifiedCode;
 
-/// One byte in so many is changed, so that an artefact costs so many verifications.
+/// The number of changed bytes, and so of verifications, for each artefact.
 constexpr std::size_t kTrials = 8;
 
 struct Verified {
@@ -32,7 +32,7 @@ struct Verified {
     }
     bool isWithoutFault() const { return !has(Outcome::failed) && !has(Outcome::unreadable); }
 
-    /// Without a signer's message: parts of a certificate whose issuer is not there are covered by nothing.
+    /// Without a signer's message: nothing covers parts of a certificate without its issuer.
     bool isAdHoc() const {
         std::size_t signers = 0;
         for (const Check& check : checks) {

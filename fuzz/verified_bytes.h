@@ -1,5 +1,5 @@
-// What the targets of deep verification share: the bytes of an artefact are verified in memory, and claims
-// hold for whatever comes of it.
+// Shared code of the targets of deep verification: verifies an artefact's bytes in memory, and makes claims
+// about the result.
 #pragma once
 
 #include <functional>
@@ -15,12 +15,12 @@ namespace pinwell::fuzz {
 using Verification =
     std::function<verify::VerifiedCode(const codesign::ByteSource&, verify::Workers&, verify::Section&)>;
 
-/// Whether the signature covers all that is not signature, so that every byte counts.
+/// Whether the signature covers all bytes outside it, so that every byte counts.
 enum class Coverage { whole, partial };
 
-/// Claims of `input`: every check is complete, and a second run says the same. In an artefact that is signed
-/// ad hoc, has no fault and is covered whole, no byte may change unnoticed: some bytes, chosen by the input,
-/// are tried.
+/// Claims about `input`: every check is complete, and a second run has the same result. An artefact with an
+/// ad-hoc signature, without a fault and covered whole: no byte may change unnoticed. Some bytes, chosen by
+/// the input, are tried.
 void examineVerified(ByteView input, const Verification& verification, Coverage coverage);
 
 }  // namespace pinwell::fuzz

@@ -1,10 +1,10 @@
 // Deep verification of a disk image: trailer, signature, pages, and the block table as a second opinion.
 //
-// The first byte of the input says what the rest is:
+// The first byte of the input gives the kind of the rest:
 //
-//   0  an image as it is
-//   1  a block table, whose length comes first in two bytes, and the data that it speaks of: in Base64 in a
-//      property list, the fuzzer would not find its fields
+//   0  a whole image
+//   1  a block table, after its length in two bytes, and its data: the fuzzer would not find the fields of a
+//      table in Base64 in a property list
 #include <algorithm>
 
 #include "foundation/byte_reader.h"
@@ -25,7 +25,7 @@ Data imageAround(ByteView input) {
     return test::imageOfTable(table, data, {.data = test::crcOf(data)});
 }
 
-/// A stapled ticket has a signature of its own, at which nobody looks here.
+/// A stapled ticket has its own signature, which is not checked here.
 bool mayHoldTicket(ByteView image) {
     const Data slot = foundation::ByteWriter().be32(0x10002).data();
     return std::search(image.begin(), image.end(), slot.begin(), slot.end()) != image.end();

@@ -1,12 +1,10 @@
-// Deep verification of a flat package: table of contents, signatures, everything in the heap, what is behind
-// it.
+// Deep verification of a flat package: table of contents, signatures, the whole heap, and the bytes after it.
 //
-// The first byte of the input says what the rest is:
+// The first byte of the input gives the kind of the rest:
 //
-//   0  a package as it is
-//   1  a document and, behind its last "</xar>", what follows the checksum in the heap: compressed and under
-//   a
-//      checksum, the fuzzer would not get past its first change
+//   0  a whole package
+//   1  a document and, after its last "</xar>", the heap after the checksum: under compression and a checksum
+//      the fuzzer would not get past its first change
 #include "support/archive_builder.h"
 #include "verified_bytes.h"
 #include "verify/archive_table.h"

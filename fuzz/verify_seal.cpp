@@ -1,4 +1,4 @@
-// The seal of a bundle's resources: what it lists, its rules, and the requirements on nested code.
+// The seal of a bundle's resources: its list, its rules, and the requirements on nested code.
 #include <algorithm>
 
 #include "codesign/code_error.h"

@@ -1,4 +1,4 @@
-# Run by cpack when the packages are made: packs each again, and puts its bill of materials beside it.
+# cpack runs this after it has made the packages: packs each again, and puts its bill of materials beside it.
 if(NOT CPACK_GENERATOR STREQUAL "DEB")
   return()
 endif()

@@ -1,6 +1,6 @@
-# Run by cpack when the files of all packages stand in folders of their own, before they are packed.
+# cpack runs this when each package's files are in a folder, before it packs them.
 if(NOT CPACK_GENERATOR STREQUAL "DEB")
-  return()  # rpm has its own way with dates and manuals
+  return()  # rpm handles dates and manuals itself
 endif()
 file(GLOB trees LIST_DIRECTORIES true ${CPACK_TEMPORARY_DIRECTORY}/*)
 foreach(tree IN LISTS trees)
@@ -12,7 +12,7 @@ foreach(tree IN LISTS trees)
             "${CPACK_PACKAGE_CONTACT}" "${CPACK_DEBIAN_${group}_PACKAGE_RECOMMENDS}" ${CPACK_PINWELL_COMPILED_IN_${group}}
     COMMAND_ERROR_IS_FATAL ANY)
   if(group STREQUAL "LIBRARY")
-    # Fails if a symbol of an earlier version is gone, or one has no version.
+    # Fails if a symbol of an earlier version is missing, or a symbol has no version.
     file(GLOB_RECURSE library ${tree}/usr/lib*/libpinwell-ticket.so.${CPACK_PACKAGE_VERSION}*)
     execute_process(
       COMMAND dpkg-gensymbols -p${CPACK_DEBIAN_LIBRARY_PACKAGE_NAME} -v${CPACK_PACKAGE_VERSION} -P${tree} -e${library}

@@ -1,9 +1,9 @@
-# How the scripts build: one line of progress, and the first errors when it fails. Sourced.
+# The scripts' way of building: one line of progress, and the first errors if the build fails. Sourced.
 
-# A clone finds the objects of another one in ccache, and no compiler is asked again for what it has said already.
+# All clones share their objects in ccache, so no clone compiles a source that another one has compiled.
 export CCACHE_BASEDIR=${CCACHE_BASEDIR:-$PWD} CCACHE_NOHASHDIR=${CCACHE_NOHASHDIR:-1}
 
-# first_errors LOG: what the first failed steps of a build said, without the compilers' long command lines.
+# first_errors LOG: the messages of the first failed steps of a build, without the compilers' long command lines.
 first_errors() {
   awk '
     /^FAILED: / { failed = 1; count++; if (count <= 3) print; command = 1; next }
@@ -11,16 +11,16 @@ first_errors() {
     /^\[[0-9]+\/[0-9]+\] / { failed = 0 }
     failed && count <= 3 && lines < 60 { print; lines++ }
   ' "$1" > "$1.errors"
-  # It may have ended before the first step, or without one that says so.
+  # The build may have ended before the first step, or without a failed step in the log.
   if [ -s "$1.errors" ]; then cat "$1.errors"; else grep -m 20 -iE -A 5 'error' "$1" || tail -n 20 "$1"; fi
   rm -f "$1.errors"
 }
 
-# last_step LOG: how far a build has come, in ninja's own words.
+# last_step LOG: the progress of a build, in ninja's own words.
 last_step() { grep -aE '^\[[0-9]+/[0-9]+\] ' "$1" 2> /dev/null | tail -n 1; }
 
-# watch_build LOG: shows the last step of a build, on a terminal in place and elsewhere once a minute. Runs until its input
-# ends. (It is not ended by a signal: bash would run the traps of the script that has started it.)
+# watch_build LOG: shows the last step of a build: on a terminal in place, elsewhere once a minute. Runs until its input
+# ends. (A signal would make bash run the traps of the calling script.)
 watch_build() {
   local step shown='' seconds=0 columns
   if [ -t 1 ]; then
@@ -40,15 +40,15 @@ watch_build() {
   fi
 }
 
-# goes_on SECONDS: waits so long, and fails as soon as the input ends.
+# goes_on SECONDS: waits for this time, and fails as soon as the input ends.
 goes_on() {
   local code=0
   read -r -t "$1" || code=$?
   [ $code -gt 128 ]
 }
 
-# build_preset PRESET [OPTION...] [TARGET...]: configures, with options of cmake that begin with -D, and builds;
-# build/PRESET/build.log has all that was said. Ends with the first errors and the log's name, and with 1, when it fails.
+# build_preset PRESET [OPTION...] [TARGET...]: configures, with cmake's options that begin with -D, and builds. The
+# whole output is in build/PRESET/build.log. On failure it prints the first errors and the log's name, and returns 1.
 build_preset() {
   local preset=$1 log=build/$1/build.log building watcher status=0 options=()
   shift
@@ -65,6 +65,6 @@ build_preset() {
   [ $status -ne 0 ] || return 0
   echo "The build failed. The first errors:"
   first_errors "$log"
-  echo "All that was said is in $log."
+  echo "The whole output is in $log."
   return 1
 }

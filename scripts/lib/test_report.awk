@@ -1,12 +1,12 @@
-# What a run of ctest has to tell, from what it printed and from the LastTest.log that it left:
+# Summarises a run of ctest, from its output and from its LastTest.log:
 #
-#   awk -v part=failures -f test_report.awk PRINTED LastTest.log     each failed test with what it said
-#   awk -v part=skips -f test_report.awk PRINTED LastTest.log        REASON<tab>NAME for each test that was left out
-#   awk -v part=counts -f test_report.awk PRINTED LastTest.log       PASSED FAILED SKIPPED TESTS, the last as ctest counts
+#   awk -v part=failures -f test_report.awk PRINTED LastTest.log     each failed test with its output
+#   awk -v part=skips -f test_report.awk PRINTED LastTest.log        REASON<tab>NAME for each skipped test
+#   awk -v part=counts -f test_report.awk PRINTED LastTest.log       PASSED FAILED SKIPPED, and ctest's number of tests
 #
-# A test of ctest is a program: one case of GoogleTest, many of them, or a script. Of many cases, those are told that
-# failed or were left out, and all are counted. LastTest.log alone does not tell: it has skipped tests for passed. Of a
-# test that was tried more than once, the last time counts.
+# A test of ctest is a program: one case of GoogleTest, many cases, or a script. Of many cases, the failed and skipped
+# ones are listed, and all are counted. LastTest.log alone is not enough: in it, skipped tests have passed. If a test
+# was tried more than once, the last try counts.
 
 function tell(  i) {
   printf "\n-- %s (%s)\n", name, result[name]
@@ -19,7 +19,7 @@ function skip(who, why) {
   if (part == "skips") printf "%s\t%s\n", why == "" ? "no reason given" : why, who
 }
 
-# What became of the cases of the program that has just ended.
+# Counts the results of the cases of the program that has just ended.
 function tally() {
   if (!totals) {
     passed_of[name] = failed_of[name] = skipped_of[name] = 0
@@ -30,7 +30,7 @@ function tally() {
   }
   passed_of[name] = passed
   skipped_of[name] = skipped
-  # One that broke down behind its last case, say.
+  # For example, the program crashed after its last case.
   failed_of[name] = failed == 0 && result[name] != "" && result[name] != "Skipped" ? 1 : failed
 }
 
@@ -65,7 +65,7 @@ inside {
   if (totals && $0 ~ /^\[  FAILED  \] [0-9]+ tests?, listed below:$/) failed = $4
   if ($0 ~ /^\[ RUN      \] /) start = count
   said[++count] = $0
-  # A case that went well, or was left out, is not what made its program fail.
+  # A case that passed or was skipped is not the cause of its program's failure.
   if ($0 ~ /^\[       OK \] /) count = start
   if ($0 ~ /^\[  SKIPPED \] [^ ]+ \(/) { skip($4, reason); cases++; reason = ""; count = start }
   if (in_reason && $0 == "") in_reason = 0
