@@ -1,10 +1,10 @@
-// Inputs that would make a parser, or the library behind it, work out of proportion to their length.
+// Inputs for which a parser, or the library behind it, might work out of proportion to their length.
 //
-// A row is a builder of such an input and a builder of an innocent one of the same length, its control, which
-// the same reader takes. costly_test holds each row's processor time against its control's, and its memory
-// against its length; bench/hostile measures the same rows at 16 MiB, in seconds and mebibytes.
+// A row has a builder of such an input, and a builder of its control: a harmless input of the same length for
+// the same reader. costly_test compares each row's processor time with its control's, and its memory with its
+// length; bench/hostile measures the same rows at 16 MiB, in seconds and mebibytes.
 //
-// A library that is handed input has a file of rows here, whose function is one line in costly_inputs.cpp.
+// Each library with input has a file of rows here, whose function is one line in costly_inputs.cpp.
 #pragma once
 
 #include <cstddef>
@@ -22,20 +22,20 @@ using foundation::Data;
 
 struct CostlyInput {
     std::string name;  // as part of a test's name
-    std::string cost;  // in one line: what there is a lot of, or what it could set to work
+    std::string cost;  // in one line: the frequent element, or the expensive work
 
-    /// Reads an input as the programs do. Returns whether it was taken, false if it was refused.
+    /// Reads an input as the programs do. Returns true if it is accepted, false if it is refused.
     std::function<bool(const Data&)> read;
 
-    /// What becomes of the costly input at a quarter of a mebibyte. The control is always taken.
+    /// Whether a costly input of a quarter of a mebibyte is accepted. The control always is.
     bool isTaken = false;
 
-    /// An input of about `length` bytes, and not much longer. The same for the same
-    /// length. The control of a compressed input may hold what that comes to, and be longer.
+    /// An input of about `length` bytes, always the same for the same length. The control of a compressed
+    /// input may contain the uncompressed bytes, and be longer.
     std::function<Data(std::size_t length)> costly;
     std::function<Data(std::size_t length)> control;
 
-    /// The most processor time that the costly input may take, as a multiple of its control's.
+    /// The highest processor time of the costly input, as a multiple of its control's.
     double times = 10;
 
     friend void PrintTo(const CostlyInput& row, std::ostream* out) { *out << row.cost; }
@@ -44,7 +44,7 @@ struct CostlyInput {
 /// Every row, in a fixed order; the names are distinct.
 const std::vector<CostlyInput>& costlyInputs();
 
-/// `text` as often as it takes to come to about `length` bytes, at least once.
+/// Repeats `text` up to about `length` bytes, at least once.
 std::string filled(std::string_view text, std::size_t length);
 
 /// `make(0)`, `make(1)` and so on, up to about `length` bytes.

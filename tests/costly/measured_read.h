@@ -1,4 +1,4 @@
-// One read of an input, measured in a process of its own.
+// One read of an input, measured in a separate process.
 #pragma once
 
 #include <functional>
@@ -9,7 +9,7 @@
 namespace pinwell::test {
 
 struct MeasuredRead {
-    /// Why there is no result: the process was ended, by what; or the reader threw. Empty otherwise.
+    /// Why there is no result: the end of the process, or the reader's exception. Empty otherwise.
     std::string failure;
 
     bool isTaken = false;
@@ -17,12 +17,12 @@ struct MeasuredRead {
     double mebibytes = 0;  // that the process grew by, at most: resident memory
 };
 
-/// The input is read `runs` times by a forked child, which may take `limit` seconds of processor time in all.
-/// The caller must have one thread.
+/// A forked child reads the input `runs` times, within `limit` seconds of processor time in all. The caller
+/// must have one thread.
 MeasuredRead measureRead(const std::function<bool(const foundation::Data&)>& read,
                          const foundation::Data& input, int runs, unsigned limit);
 
-/// Whether resident memory says what the code needs: not under a sanitizer, which has memory of its own.
+/// Whether resident memory measures the code's needs: not under a sanitizer, which needs memory itself.
 bool memoryIsMeasured();
 
 }  // namespace pinwell::test

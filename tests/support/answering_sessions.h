@@ -1,4 +1,4 @@
-// HTTPS sessions without a network that answer as they are asked, by what the test says. From any thread.
+// HTTPS sessions without a network. A function of the test gives their responses. For any thread.
 //
 //   AnsweringSessions sessions([](const https::Request& request) {
 //       return AnsweringSessions::Reply{.status = 503, .headers = {{"Retry-After", "0"}}};
@@ -29,7 +29,7 @@ class AnsweringSessions : public https::SessionService {
         https::Headers headers = {};
         std::string body = {};
         std::optional<foundation::Error> error = {};
-        bool isByAStranger = false;  // the server's certificate is put to the delegate, who must refuse it
+        bool isByAStranger = false;  // the delegate gets the server's certificate, and must refuse it
         bool neverComes = false;     // it ends with the session
     };
     using Handler = std::function<Reply(const https::Request& request)>;
@@ -44,7 +44,7 @@ class AnsweringSessions : public https::SessionService {
         return std::shared_ptr<https::Session>(std::make_shared<Session>(*this, delegate));
     }
 
-    /// No session is to be had from now on.
+    /// After this call, no session can be made.
     void failWith(foundation::Error failure) {
         const std::lock_guard lock(mutex_);
         failure_ = std::move(failure);
@@ -53,7 +53,7 @@ class AnsweringSessions : public https::SessionService {
         const std::lock_guard lock(mutex_);
         handler_ = std::move(handler);
     }
-    /// How many sessions were made.
+    /// The number of sessions so far.
     std::size_t sessions() const {
         const std::lock_guard lock(mutex_);
         return sessions_;
@@ -62,7 +62,7 @@ class AnsweringSessions : public https::SessionService {
         const std::lock_guard lock(mutex_);
         return requests_;
     }
-    /// The names that each lookup has asked for.
+    /// The names in each lookup.
     std::vector<std::vector<std::string>> lookups() const {
         std::vector<std::vector<std::string>> all;
         for (const https::Request& request : requests())
@@ -100,7 +100,7 @@ class AnsweringSessions : public https::SessionService {
             const Reply reply = handler(request_);
             if (reply.neverComes) return;
             if (reply.isByAStranger) {
-                // One that no delegate knows how to answer.
+                // A challenge of a kind that is unknown to every delegate.
                 delegate_.didReceiveChallenge(
                     session_,
                     {.host = "stranger.example",

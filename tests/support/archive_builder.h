@@ -1,6 +1,6 @@
 // Archives (xar), field by field: header, table of contents, heap. `.build()` without any other call is a
-// valid unsigned archive with an SHA-1 checksum; `.signature("CMS")` signs it. What is overridden by hand is
-// written as given; all else follows.
+// valid unsigned archive with an SHA-1 checksum; `.signature("CMS")` signs it. Overridden fields are written
+// as given; all others follow from the contents.
 //
 //   header | table of contents, a zlib stream | heap: checksum, signatures, a file's data
 #pragma once
@@ -33,10 +33,10 @@ class ArchiveBuilder {
     /// sha512 4.
     ArchiveBuilder& algorithm(std::uint32_t value) { return set(algorithm_, value); }
 
-    /// What follows byte 28 of the header, as it is; the header grows by it.
+    /// The bytes after byte 28 of the header, unchanged; the header grows by them.
     ArchiveBuilder& headerTail(Data bytes) { return set(headerTail_, std::move(bytes)); }
 
-    /// Which digest makes the checksum: a name that OpenSSL knows, or "none".
+    /// The checksum's digest: a name that OpenSSL knows, or "none".
     ArchiveBuilder& digest(std::string name) { return set(digest_, std::move(name)); }
 
     /// The digest, named in a header of 28 bytes and the name, zero-padded to a multiple of 4.
@@ -45,11 +45,11 @@ class ArchiveBuilder {
     /// The whole document.
     ArchiveBuilder& toc(std::string xml) { return set(toc_, std::move(xml)); }
 
-    /// The stream in its place, and what its checksum is made of.
+    /// Replaces the stream, and the bytes under its checksum.
     ArchiveBuilder& compressedToc(Data bytes) { return set(compressedToc_, std::move(bytes)); }
 
-    /// Parts of the checksum's element: the attribute's and the elements' text. An empty text leaves out what
-    /// it would stand in.
+    /// Parts of the checksum's element: the text of the attribute and of the elements. An empty text omits
+    /// its element or attribute.
     ArchiveBuilder& checksumStyle(std::string value) { return set(checksumStyle_, std::move(value)); }
     ArchiveBuilder& checksumOffset(std::string value) { return set(checksumOffset_, std::move(value)); }
     ArchiveBuilder& checksumSize(std::string value) { return set(checksumSize_, std::move(value)); }
@@ -64,14 +64,14 @@ class ArchiveBuilder {
     /// The checksum in the heap; by default the right one.
     ArchiveBuilder& checksum(Data bytes) { return set(checksum_, std::move(bytes)); }
 
-    /// What stands in the heap before the checksum, and after it.
+    /// Bytes in the heap before the checksum, and after it.
     ArchiveBuilder& beforeChecksum(Data bytes) { return set(beforeChecksum_, std::move(bytes)); }
     ArchiveBuilder& afterChecksum(Data bytes) { return set(afterChecksum_, std::move(bytes)); }
 
     /// The right checksum of the table of contents.
     Data rightChecksum() const;
 
-    /// Where the heap begins.
+    /// The offset of the heap.
     std::size_t heapStart() const;
 
     Data build() const;

@@ -197,7 +197,7 @@ void addExtensions(X509* certificate, const CertificateFields& fields, const std
     for (const ExtensionField& extension : fields.extensions) addExtension(certificate, extension);
 }
 
-/// A context that signs as the fields say. `choices` belongs to it.
+/// A context that signs according to the fields. `choices` belongs to it.
 DigestHandle signingContext(const SigningKey& signer, const CertificateFields& fields) {
     const bool choosesDigest = EVP_PKEY_is_a(signer.native(), "ED25519") != 1;
     const EVP_MD* const digest =
@@ -399,7 +399,7 @@ Data underOtherSignature(ByteView certificate, const SigningKey& issuer) {
     const std::size_t signedSize = body->whole.size() + algorithm->whole.size();
     const auto bits = trust::der::readElement(whole->contents.subspan(signedSize));
     require(bits.has_value() && !bits->contents.empty(), "no signature");
-    const Data other = otherSignature(bits->contents.subspan(1), issuer);  // behind the count of unused bits
+    const Data other = otherSignature(bits->contents.subspan(1), issuer);  // after the count of unused bits
     return derElement(0x30, ByteWriter()
                                 .bytes(whole->contents.first(signedSize))
                                 .bytes(derElement(0x03, ByteWriter().u8(0).bytes(other).data()))

@@ -1,6 +1,6 @@
 // Certificates made field by field, for tests of chains, tickets, signatures and TLS servers.
 //
-//   TicketChain chain;                              // root, intermediate and leaf, all as they should be
+//   TicketChain chain;                              // root, intermediate and leaf, all valid
 //   chain.leaf.markers.clear();                     // one wrong field is one visible line
 //   const IssuedChain issued = chain.issue();
 //   issued.leaf.der, issued.root.pem(), issued.leaf.key.sign(message) ...
@@ -39,15 +39,15 @@ enum class KeyKind {
 /// A key pair. Copies share it.
 class SigningKey {
   public:
-    /// A key pair of its own.
+    /// A new key pair.
     static SigningKey generate(KeyKind kind);
 
-    /// The same key pair whenever kind and name are the same, made once a process. What a chain uses by
-    /// default, and the way to have RSA keys without waiting for one at every turn. May be called from any
+    /// The same key pair for the same kind and name, made once in each process. It is the
+    /// default of chains. Use it for RSA keys too, because making one takes long. For any
     /// thread.
     static SigningKey cached(KeyKind kind, const std::string& name);
 
-    /// On the curve of that name, of OpenSSL's. A key pair of its own.
+    /// A new key pair on the curve with OpenSSL's name.
     static SigningKey onCurve(const char* curve);
 
     /// PKCS #8, unencrypted.
@@ -84,10 +84,10 @@ struct BasicConstraints {
 struct ExtensionField {
     std::string oid;  // dotted
     bool critical = false;
-    foundation::Data value{std::byte{0x05}, std::byte{0x00}};  // DER; a NULL unless said otherwise
+    foundation::Data value{std::byte{0x05}, std::byte{0x00}};  // DER; the default is a NULL
 };
 
-/// MD5 goes with an RSA issuer only: ECDSA has no identifier for it.
+/// MD5 needs an RSA issuer: ECDSA has no identifier for it.
 enum class SignatureDigest { md5, sha1, sha256, sha384 };
 
 /// Of an RSASSA-PSS signature.
@@ -96,7 +96,7 @@ struct PssDigests {
     SignatureDigest mask = SignatureDigest::sha256;
 };
 
-/// What becomes of a key identifier extension.
+/// The form of a key identifier extension.
 struct KeyIdentifier {
     enum class Kind { computed, omitted, given };
     Kind kind = Kind::computed;
@@ -106,10 +106,10 @@ struct KeyIdentifier {
     static KeyIdentifier given(std::string_view bytes) { return {Kind::given, foundation::toData(bytes)}; }
 };
 
-/// What a certificate is put together from, each an encoded element; an empty one is left out. What the
-/// fields cannot say, since OpenSSL does not write it, an edit of these does.
+/// The parts of a certificate, each an encoded element; an empty one is left out. Tests edit these for forms
+/// that OpenSSL does not write.
 struct CertificateElements {
-    foundation::Data version;  // [0] and what is in it
+    foundation::Data version;  // [0] and its contents
     foundation::Data serialNumber;
     foundation::Data innerAlgorithm;
     foundation::Data issuer;
@@ -118,21 +118,21 @@ struct CertificateElements {
     foundation::Data key;
     foundation::Data issuerUniqueIdentifier;   // [1]
     foundation::Data subjectUniqueIdentifier;  // [2]
-    foundation::Data extensions;               // [3] and what is in it
+    foundation::Data extensions;               // [3] and its contents
     foundation::Data outerAlgorithm;
-    std::optional<foundation::Data> signature = std::nullopt;  // a BIT STRING; made anew unless given
+    std::optional<foundation::Data> signature = std::nullopt;  // a BIT STRING; a new signature if absent
 };
 
 /// Takes an issued certificate apart; its signature is left out.
 CertificateElements takeApart(foundation::ByteView certificate);
 
-/// All that goes into a certificate but its issuer. Extensions are written in the order of the members.
+/// The contents of a certificate, except its issuer. Extensions are in the order of the members.
 struct CertificateFields {
     int version = 3;
     std::int64_t serial = 1;
     DistinguishedName subject = {{"O", "Pinwell Tests"}, {"CN", "Certificate"}};
     std::optional<DistinguishedName> issuer =
-        std::nullopt;  // the issuing certificate's subject unless said otherwise
+        std::nullopt;  // the default is the issuing certificate's subject
     SigningKey key = SigningKey::cached(KeyKind::p256, "default");
     foundation::Date notBefore = {1577836800};  // 2020-01-01 00:00:00 UTC
     foundation::Date notAfter = {2524607999};   // 2049-12-31 23:59:59 UTC
@@ -145,17 +145,17 @@ struct CertificateFields {
     KeyIdentifier subjectKeyIdentifier = {};   // computed: SHA-1 of the public key
     KeyIdentifier authorityKeyIdentifier =
         {};                                 // computed: the issuer's subject key identifier, when it has one
-    std::vector<std::string> markers = {};  // dotted OIDs, each an extension that holds a NULL, not critical
+    std::vector<std::string> markers = {};  // dotted OIDs, each an extension with a NULL, not critical
     std::vector<ExtensionField> extensions = {};
 
     SignatureDigest digest = SignatureDigest::sha256;
-    std::optional<SigningKey> signer = std::nullopt;  // the issuing certificate's key unless said otherwise
+    std::optional<SigningKey> signer = std::nullopt;  // the default is the issuing certificate's key
     bool corruptSignature = false;                    // flips the last bit of the finished certificate
-    std::function<void(CertificateElements&)> edit = nullptr;  // before it is signed, whatever comes of it
+    std::function<void(CertificateElements&)> edit = nullptr;  // before it is signed; any result is allowed
     std::optional<PssDigests> pss = std::nullopt;              // an RSA signer signs by RSASSA-PSS
 };
 
-/// A certificate and what it takes to issue others with it.
+/// A certificate with its key, to issue others.
 struct IssuedCertificate {
     foundation::Data der;
     SigningKey key;
@@ -168,8 +168,8 @@ struct IssuedCertificate {
 /// Null `issuer`: signed with its own key, under its own name.
 IssuedCertificate issueCertificate(const CertificateFields& fields, const IssuedCertificate* issuer);
 
-/// The certificate under the signature that anyone can make of its own: where (r, s) verifies, (r, n - s)
-/// does too (n is the order of the curve). Its issuer's key, an elliptic-curve one, says the curve.
+/// The certificate with the signature that anyone can derive: if (r, s) verifies, so does (r, n - s), where n
+/// is the order of the curve. The issuer's elliptic-curve key gives the curve.
 foundation::Data underOtherSignature(foundation::ByteView certificate, const SigningKey& issuer);
 
 /// A PEM block of that label around the bytes.
@@ -187,7 +187,7 @@ struct IssuedChain {
     std::string serverPem() const { return leaf.pem() + intermediate.pem(); }
 };
 
-/// Three certificates whose fields can be changed before they are issued, each by the one above it.
+/// Three certificates with changeable fields, each issued by the one above it.
 struct ChainFields {
     CertificateFields root;
     CertificateFields intermediate;

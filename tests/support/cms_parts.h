@@ -1,5 +1,5 @@
-// A CMS message in parts that can be changed, left out and repeated, laid out without the code under test. A
-// good message is taken apart, changed, and put together again; or made of nothing, around any public key.
+// A CMS message in parts that a test can change, omit and repeat, without the code under test. The parts come
+// from a valid message, or are made around any public key.
 #pragma once
 
 #include <cstdint>
@@ -14,10 +14,10 @@ namespace pinwell::test {
 using foundation::ByteView;
 using foundation::Data;
 
-/// DER of our own: the elements that stand in `contents` end to end.
+/// The consecutive elements in `contents`, in DER made by the tests.
 std::vector<Data> derElements(ByteView contents);
 
-/// The contents of a DER element of our own.
+/// The contents of an element, in DER made by the tests.
 ByteView derContents(ByteView element);
 
 Data joined(const std::vector<Data>& parts);
@@ -59,12 +59,12 @@ struct CmsParts {
     Data build() const;
 };
 
-/// A certificate with that public key, by "Signer", number 1, that nobody has signed; with a key identifier
-/// or without.
+/// An unsigned certificate with that public key, issued by "Signer", number 1; with a key identifier or
+/// without.
 Data certificateAround(const Data& publicKey, std::optional<std::string_view> keyIdentifier = {});
 
-/// A SubjectPublicKeyInfo of an RSA key whose modulus has as many bits, and whose exponent is 1: whatever is
-/// padded is its own signature.
+/// A SubjectPublicKeyInfo of an RSA key with a modulus of `bits` bits and exponent 1: each padded message is
+/// its own signature.
 Data rsaKeyOfExponentOne(std::size_t bits);
 
 /// A message over `content` by that key, without signed attributes.

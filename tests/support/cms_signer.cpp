@@ -42,7 +42,7 @@ Identity makeIdentity(TestKey kind) {
     X509* certificate = identity.certificate.get();
     require(certificate != nullptr && X509_set_version(certificate, 2) == 1, "certificate");
     ASN1_INTEGER_set(X509_get_serialNumber(certificate), 1);
-    // Already expired: dates are nothing that a reader of code signatures may ask about.
+    // Already expired: a reader of code signatures must ignore the dates.
     ASN1_TIME_set_string_X509(X509_getm_notBefore(certificate), "20200101000000Z");
     ASN1_TIME_set_string_X509(X509_getm_notAfter(certificate), "20200102000000Z");
     X509_NAME* name = X509_get_subject_name(certificate);
@@ -101,7 +101,7 @@ Message signMessage(const Identity& identity, int contentType, ByteView content,
     require(signer != nullptr, "signer");
     if (pss) {
         EVP_PKEY_CTX* const choices = CMS_SignerInfo_get0_pkey_ctx(signer);
-        // What the library chooses by itself differs between its versions.
+        // The library's own choice differs between its versions.
         require(EVP_PKEY_CTX_set_rsa_padding(choices, RSA_PKCS1_PSS_PADDING) == 1 &&
                     EVP_PKEY_CTX_set_rsa_pss_saltlen(choices, CmsBuilder::kPssSaltLength) == 1,
                 "padding");

@@ -1,6 +1,6 @@
-// CMS messages as a signer of code makes them, and time-stamp tokens as a time-stamp authority does, each
-// with the one fault a test wants. Keys are made once a process and key kind, certificates are self-signed:
-// whoever reads these messages must not ask whom they come from.
+// CMS messages like those of code signers, and time-stamp tokens like those of authorities, each with the one
+// fault of a test. There is one key for each kind in a process. The certificates are self-signed, so their
+// readers must not check the issuer.
 #pragma once
 
 #include <cstdint>
@@ -52,7 +52,7 @@ class TimestampBuilder {
 /// A detached SignedData with one signer, his certificate inside; DER unless ber() is called.
 class CmsBuilder {
   public:
-    /// What is signed: the code directory of slot 0.
+    /// The signed content: the code directory of slot 0.
     explicit CmsBuilder(Data content);
 
     CmsBuilder& key(TestKey value);

@@ -1,6 +1,6 @@
-// Code directories and superblobs, field by field. Valid by default; every setter says one thing, so that a
-// test shows its one wrong field in one visible line. Integers and digests are laid out here without the code
-// under test.
+// Code directories and superblobs, field by field. Valid by default. Each setter changes one field, so a
+// test shows its wrong field in one line. Integers and digests are encoded here without the code under
+// test.
 #pragma once
 
 #include <cstdint>
@@ -35,8 +35,8 @@ Data emptyRequirements();
 
 /// One code directory. Layout: header, identifier, team, scatter vector, special slots (highest first), code
 /// slots (bytes AB). By default version 0x20400, flags 2 (ad hoc), "com.example.sample", SHA-256, no special
-/// slots, two code slots. What is overridden by hand (offsets, counts, sizes) is written as given; the layout
-/// does not follow.
+/// slots, two code slots. Overridden values (offsets, counts, sizes) are written as given; the layout does
+/// not follow them.
 class CodeDirectoryBuilder {
   public:
     CodeDirectoryBuilder& magic(std::uint32_t value) { return set(magic_, value); }
@@ -100,7 +100,7 @@ class CodeDirectoryBuilder {
     std::optional<std::uint8_t> digestSize_;
 };
 
-/// One superblob. Without any call it is empty and valid (12 bytes). Blobs stand in the order of their
+/// One superblob. Without any call it is empty and valid (12 bytes). Blobs are in the order of their
 /// addition.
 class SuperBlobBuilder {
   public:
@@ -113,10 +113,10 @@ class SuperBlobBuilder {
     /// This many bytes of EE before the next blob.
     SuperBlobBuilder& gap(std::size_t size);
 
-    /// Lists the blobs last to first; they stay where they are.
+    /// Lists the blobs in reverse order; the blobs do not move.
     SuperBlobBuilder& reverseIndex() { return set(reverse_, true); }
 
-    /// The blob of `slot` is said to begin here.
+    /// Sets the offset of the blob of `slot` in the index.
     SuperBlobBuilder& offsetOf(std::uint32_t slot, std::uint32_t value);
 
     SuperBlobBuilder& magic(std::uint32_t value) { return set(magic_, value); }
@@ -125,8 +125,8 @@ class SuperBlobBuilder {
 
     Data build() const;
 
-    /// An ad-hoc signature: `directory`, the empty requirements, which it should cover, and an empty CMS
-    /// blob.
+    /// An ad-hoc signature: `directory`, the empty requirements, which `directory` should cover, and an empty
+    /// CMS blob.
     static SuperBlobBuilder adHoc(Data directory);
 
     /// An ad-hoc signature with the default code directory.

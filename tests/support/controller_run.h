@@ -1,4 +1,4 @@
-// One run of the controller over a bundle, with the test in the place of the network.
+// One run of the controller over a bundle; the test replaces the network.
 #pragma once
 
 #include <functional>
@@ -13,9 +13,9 @@
 
 namespace pinwell::test {
 
-/// What a run of the tool ends with that finds this body in the answer to its lookup, if it asks. The
-/// services are of that platform, but for those that the test has replaced. `meanwhile` happens between
-/// question and answer.
+/// The exit code of a run of the tool with this response body to its lookup, if it sends one. The services
+/// are the platform's, except the services that the test has replaced. `meanwhile` runs between request and
+/// response.
 int statusOfRun(std::uint8_t operation, const foundation::URL& path, TestPlatform& platform,
                 const Platform& services, std::string_view answer,
                 const std::function<void()>& meanwhile = {});
@@ -35,13 +35,13 @@ class ControllerRun {
     /// The request of the lookup's one task; fails the test when there is none.
     const https::Request& request() const;
 
-    /// Answers the lookup; what the process ends with.
+    /// Completes the lookup with this body; returns the exit code.
     std::optional<int> answer(std::string_view body,
                               https::Headers headers = {{"X-Ostrel-Request-UUID", "REQUEST"}},
                               int status = 200);
     std::optional<int> fail(const foundation::Error& error);
 
-    /// A lookup answer with the ticket inline.
+    /// A lookup response with the ticket inline.
     static std::string inlineAnswer(const foundation::Data& ticket);
 
     TestPlatform platform;

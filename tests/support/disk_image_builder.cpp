@@ -11,7 +11,7 @@ namespace {
 constexpr std::size_t kTrailerSize = 512;
 constexpr std::size_t kCodeSignFields = 296;
 
-// Up to `end`, with what no two neighbouring fields have in common.
+// Fills up to `end` with a pattern that differs between neighbouring fields.
 void fillUpTo(std::size_t end, ByteWriter& writer) {
     while (writer.size() < end) writer.u8(static_cast<std::uint8_t>(writer.size() * 7 + 1));
 }

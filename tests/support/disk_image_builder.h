@@ -1,5 +1,5 @@
-// Disk images, field by field. Without any call: an unsigned image of 1000 bytes of data. Every byte of the
-// trailer that has no meaning here is filled with a pattern, so that one that gets lost shows.
+// Disk images, field by field. Without any call: an unsigned image of 1000 bytes of data. A pattern fills all
+// meaningless bytes of the trailer, so a lost byte is visible.
 #pragma once
 
 #include <cstdint>
@@ -13,7 +13,7 @@ namespace pinwell::test {
 
 inline constexpr std::uint32_t kSampleTicketSlot = 0x10002;
 
-/// A stapled ticket as it stands in a superblob.
+/// A stapled ticket in the form of a superblob's blob.
 Data ticketBlob(std::string_view ticket);
 
 class DiskImageBuilder {
@@ -25,7 +25,7 @@ class DiskImageBuilder {
     DiskImageBuilder& superblob(Data bytes) { return set(superblob_, std::move(bytes)); }
     DiskImageBuilder& superblob(const SuperBlobBuilder& builder) { return superblob(builder.build()); }
 
-    /// Four characters in the place of "koly".
+    /// Four characters instead of "koly".
     DiskImageBuilder& magic(std::string value) { return set(magic_, std::move(value)); }
     DiskImageBuilder& version(std::uint32_t value) { return set(version_, value); }
     DiskImageBuilder& codeSignOffset(std::uint64_t value) { return set(codeSignOffset_, value); }

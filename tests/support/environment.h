@@ -7,7 +7,7 @@
 
 namespace pinwell::test {
 
-/// Only while no other thread looks at the environment.
+/// Use it only while no other thread reads the environment.
 class ScopedVariable {
   public:
     ScopedVariable(std::string name, const std::optional<std::string>& value) : name_(std::move(name)) {

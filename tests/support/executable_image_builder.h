@@ -15,8 +15,8 @@ namespace pinwell::test {
 inline constexpr std::uint32_t kSampleArm = 0x0100000C;
 inline constexpr std::uint32_t kSampleX86 = 0x01000007;
 
-/// A thin image: header, load commands (one that is of no interest, then 0x1D), 64 bytes of code, the
-/// signature. By default 64-bit, little-endian, CPU type 0x0100000C.
+/// A thin image: header, load commands (an irrelevant one, then 0x1D), 64 bytes of code, the signature. By
+/// default 64-bit, little-endian, CPU type 0x0100000C.
 class ExecutableImageBuilder {
   public:
     ExecutableImageBuilder& bigEndian() { return set(bigEndian_, true); }
@@ -68,8 +68,8 @@ class ExecutableImageBuilder {
     std::optional<std::uint32_t> signatureLength_;
 };
 
-/// A universal image; by default with 32-bit entries. Slices stand in the order of their addition, each at
-/// the next multiple of 64. Without any slice it gets one: ExecutableImageBuilder's default.
+/// A universal image; by default with 32-bit entries. Slices are in the order of their addition, each at the
+/// next multiple of 64. Without any slice it gets one: ExecutableImageBuilder's default.
 class UniversalImageBuilder {
   public:
     UniversalImageBuilder& slice(std::uint32_t cpuType, Data image);
@@ -90,11 +90,11 @@ class UniversalImageBuilder {
     std::optional<std::uint32_t> count_;
     std::map<std::size_t, std::uint64_t> offsets_;
     std::map<std::size_t, std::uint64_t> sizes_;
-    std::map<std::size_t, std::uint32_t> subtypes_;  // 0 where none is given
+    std::map<std::size_t, std::uint32_t> subtypes_;  // 0 by default
 };
 
-/// A bundle directory. By default its property list names the executable "Sample", which stands in
-/// Contents/Programs and is ExecutableImageBuilder's default.
+/// A bundle directory. By default its property list names the executable "Sample". This is
+/// ExecutableImageBuilder's default, in Contents/Programs.
 class BundleBuilder {
   public:
     BundleBuilder& executableName(std::string name);
@@ -110,7 +110,7 @@ class BundleBuilder {
     /// The separate form of a signature: the files in Contents/_CodeSignature. An empty one is not written.
     BundleBuilder& separateSignature(Data codeDirectory, Data requirements, Data cms);
 
-    /// Writes the bundle below `path`, making the directories, and answers the path of its main executable.
+    /// Writes the bundle below `path`, with its directories, and returns the path of its main executable.
     std::string write(const std::string& path) const;
 
   private:

@@ -33,13 +33,13 @@ const std::set<std::string>& interruptible() {
     return calls;
 }
 
-// The calls that may move fewer bytes than they were asked to.
+// The calls that may move fewer bytes than requested.
 const std::set<std::string>& moving() {
     static const std::set<std::string> calls{"read", "write", "pread", "pwrite", "copy_file_range"};
     return calls;
 }
 
-// The calls that a volume without room, or out of order, refuses.
+// The calls that fail on a full or broken volume.
 const std::set<std::string>& storing() {
     static const std::set<std::string> calls{"write", "pwrite", "copy_file_range", "fallocate", "ftruncate",
                                              "fsync", "ioctl"};
@@ -140,8 +140,8 @@ void Trouble::noteFlush(int file) {
 
 }  // namespace pinwell::test
 
-// The linker's names; each does what its call does, or fails.
-// NOLINTBEGIN: reserved and variadic names that are not ours to choose
+// The linker's names; each does the work of its call, or fails.
+// NOLINTBEGIN: the linker and the system prescribe these reserved and variadic names
 using pinwell::test::current;
 using pinwell::test::fails;
 using pinwell::test::isStandardStream;
@@ -248,7 +248,7 @@ int __wrap_open(const char* path, int flags, ...) {
     return fails("open") ? -1 : __real_open(path, flags, mode);
 }
 
-// What open becomes in a fortified build when its flags are not constant.
+// The name of open in a fortified build when its flags are not constant.
 int __real___open_2(const char* path, int flags);
 int __wrap___open_2(const char* path, int flags);
 int __wrap___open_2(const char* path, int flags) {
@@ -288,7 +288,7 @@ long __wrap_syscall(long number, ...) {
     return __real_syscall(number, words[0], words[1], words[2], words[3], words[4], words[5]);
 }
 
-// Every request that the file service makes takes one word, a number or a pointer.
+// Every request of the file service takes one word, a number or a pointer.
 int __real_ioctl(int file, unsigned long request, ...);
 int __wrap_ioctl(int file, unsigned long request, ...);
 int __wrap_ioctl(int file, unsigned long request, ...) {

@@ -1,13 +1,13 @@
-// Trouble with the system's file calls, made on purpose. A test program that links to the target
-// failing_calls is linked so that the calls named in CMakeLists.txt come through here (ld's --wrap); outside
-// a Trouble's life, and on other threads, they pass on. So do reads and writes of the standard streams, which
-// are no files.
+// Provokes failures of the system's file calls. A test program with the target failing_calls is linked so
+// that the calls named in CMakeLists.txt come through here (ld's --wrap). Outside a Trouble's life, and on
+// other threads, they pass on. Reads and writes of the standard streams pass on too, because these are no
+// files.
 //
-// This is the seam for faults, rather than a library that is preloaded into the tool or a file manager that
-// fails: everything under test runs in the test's own process, so a run costs a millisecond and a test can
-// afford one for every call and every errno; it is counted in the calls that the kernel sees, those of the
-// readers of archives and signatures included, which do not come through the file service; and the code under
-// test is compiled as it is shipped.
+// Reasons for this way, instead of a preloaded library or a failing file manager:
+// everything under test runs in the test's own process, so a run takes a millisecond, and a
+// test can try every call and every errno. The count includes calls outside the file
+// service, by the readers of archives and signatures. The code under test is compiled as
+// for the product.
 #pragma once
 
 #include <cstddef>
@@ -26,8 +26,8 @@ class Trouble {
     /// The call of that number moves three bytes at most, if it is a read, a write or a copy.
     static Trouble shortAtCall(std::size_t number);
 
-    /// The volume is full (or broken, by what `reason` says) when the call of that number is made: if that
-    /// moves bytes, three arrive, and from there on nothing more can be written, made durable, cut or
+    /// From the call of that number on, the volume is full, or broken if `reason` says so. If this
+    /// call moves bytes, it moves three. After it nothing can be written, made durable, cut or
     /// extended.
     static Trouble fromCallOn(std::size_t number, int reason);
 
@@ -52,7 +52,7 @@ class Trouble {
     std::size_t callCount() const noexcept { return calls_; }
     std::size_t openedWithoutCloseOnExec() const noexcept { return inheritable_; }
 
-    /// The paths of what has been flushed to stable storage, in order.
+    /// The paths flushed to stable storage, in order.
     const std::vector<std::string>& flushed() const noexcept { return flushed_; }
 
     // For the calls themselves.

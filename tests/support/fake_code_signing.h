@@ -1,4 +1,4 @@
-// A code-signing service that answers what the test says.
+// A code-signing service with results set by the test.
 #pragma once
 
 #include <optional>
@@ -51,7 +51,7 @@ class FakeCodeSigningService : public codesign::CodeSigningService {
         return signerStatus;
     }
 
-    /// The "signature" is one byte, which setDetachedSignature asks for.
+    /// The "signature" is one byte, which setDetachedSignature expects.
     codesign::Status addSignature(codesign::Signer&, codesign::StaticCode&, std::uint32_t) override {
         if (addStatus == codesign::kSuccess) *signerParameters->detachedSignature = kSignature;
         return addStatus;

@@ -39,10 +39,10 @@ constexpr std::array<std::string_view, 9> kChanges{"createReplacementDirectory",
 
 }  // namespace
 
-// What was done and what shall fail; shared with the handles.
+// The operations so far and the failures to come; shared with the handles.
 class RecordingFileManager::Record {
   public:
-    // Writes the operation down; the error that it shall fail with, if it shall.
+    // Records the operation; returns its error if it must fail.
     std::optional<Error> note(std::string name, std::string path, std::string destination = {}) {
         const std::lock_guard lock(mutex_);
         const std::size_t number = operations_.size();
@@ -71,7 +71,7 @@ class RecordingFileManager::Record {
         cutReads_.insert_or_assign(number, length);
     }
 
-    // How much of `length` the operation that was noted last may read.
+    // How much of `length` the last recorded operation may read.
     std::uint64_t readableOf(std::uint64_t length) const {
         const std::lock_guard lock(mutex_);
         const auto found = cutReads_.find(operations_.size() - 1);
@@ -93,7 +93,7 @@ class RecordingFileManager::Record {
         return operations_;
     }
 
-    // A directory that nothing else in the trash can be in the way in.
+    // A directory without name conflicts in the trash.
     std::string freshTrashDirectory() {
         const std::lock_guard lock(mutex_);
         if (!trash_) trash_.emplace();

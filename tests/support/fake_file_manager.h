@@ -1,4 +1,4 @@
-// A file manager for tests: real files, a record of all that was done to them, and failures on demand.
+// A file manager for tests: real files, a record of all operations, and failures on demand.
 #pragma once
 
 #include <memory>
@@ -26,44 +26,44 @@ void PrintTo(const FileOperation& operation, std::ostream* stream);
 /// Directories are public.folder, links public.symlink, and all else is public.data.
 files::ItemType plainTypeNaming(const files::ItemFacts& facts);
 
-/// Passes every call on to a file manager that works on real files, writes it down first, and lets the test
-/// decide that it fails instead. The trash is a directory of its own: what is trashed never leaves the test.
-/// May be used from several threads once it is set up; its handles may outlive it.
+/// Records every call and passes it on to a file manager on real files. The test can make a call fail
+/// instead. The trash is a separate directory: trashed items never leave the test. For several threads after
+/// the setup; its handles may outlive it.
 class RecordingFileManager final : public files::FileManager {
   public:
     explicit RecordingFileManager(files::TypeNaming typeNaming = plainTypeNaming);
     explicit RecordingFileManager(std::unique_ptr<files::FileManager> real);
     ~RecordingFileManager() override;
 
-    /// From now on every operation of that name fails, and does nothing. 0 lets it work again.
+    /// After this call, every operation of that name fails, and does nothing. 0 lets it work again.
     void fail(std::string_view name, int reason);
 
-    /// The operation of that number, counted from 0 over all that were recorded, fails and does nothing.
+    /// The operation of that number, counted from 0 over all recorded ones, fails and does nothing.
     void failOperation(std::size_t number, int reason);
 
     /// The operation of that number, counted the same way, is a handle's read and finds no more than `length`
     /// bytes.
     void cutRead(std::size_t number, std::uint64_t length);
 
-    /// What volumeSupportsCloning answers, whatever the file system would say.
+    /// The result of volumeSupportsCloning, on any file system.
     void answerCloning(bool answer);
 
-    /// Where trashItem says that an item is now, without moving it there.
+    /// The location that trashItem reports, without moving the item.
     void answerTrash(const files::URL& location);
 
-    /// What temporaryDirectory answers.
+    /// The result of temporaryDirectory.
     void answerTemporaryDirectory(const files::URL& directory);
 
-    /// How often that operation was called.
+    /// The number of calls of that operation.
     std::size_t count(std::string_view name) const;
 
-    /// All operations so far, in order, those that failed included.
+    /// All operations so far, in order, with the failed ones.
     std::vector<FileOperation> operations() const;
 
     /// The same, names only.
     std::vector<std::string> names() const;
 
-    /// Those alone that change something on disk (or would have). Empty says: nothing was written.
+    /// Only operations that change files on disk, with the failed ones. If empty, nothing was written.
     std::vector<FileOperation> changes() const;
 
     files::Result<files::ResourceProperties> resourceProperties(const files::URL& item) override;
@@ -71,7 +71,7 @@ class RecordingFileManager final : public files::FileManager {
     files::Result<files::ItemState> stateOfItem(const files::URL& item) override;
     files::Result<std::unique_ptr<files::ItemLock>> lockItem(const files::URL& item,
                                                              const std::function<void()>& waiting) override;
-    /// Not written down: nothing is asked or changed by it.
+    /// Not recorded: it reads and changes nothing.
     files::Result<foundation::Anchor> holdItem(const files::URL& item) override;
     std::optional<files::URL> mainExecutableOfBundle(const files::URL& directory) override;
     files::Result<bool> volumeSupportsCloning(const files::URL& item) override;

@@ -1,4 +1,4 @@
-// HTTPS sessions without a network: they record what was asked, and the test plays the server.
+// HTTPS sessions without a network: they record the requests, and the test plays the server.
 #pragma once
 
 #include <memory>
@@ -49,7 +49,7 @@ class FakeSessionService : public https::SessionService {
         return std::shared_ptr<https::Session>(sessions.back());
     }
 
-    std::optional<foundation::Error> failure;  // of those that are made from now on
+    std::optional<foundation::Error> failure;  // of the sessions made after this is set
     std::vector<std::shared_ptr<FakeSession>> sessions;
 };
 

@@ -1,4 +1,4 @@
-// A trust service whose every answer is set by the test, and which records what it was asked.
+// A trust service with results set by the test, which records its calls.
 //
 //   FakeTrustService service;
 //   service.evaluations = {{.verdict = trust::Verdict::recoverableFailure}, {}};   // refuses once, then
@@ -6,7 +6,7 @@
 //   ... run what is under test ...
 //   EXPECT_EQ(service.policies.size(), 2U);
 //
-// The service must outlive the trust objects it makes. Not for use from several threads at once.
+// The service must outlive the trust objects it makes. Not for several threads at once.
 #pragma once
 
 #include <algorithm>
@@ -22,7 +22,7 @@
 
 namespace pinwell::test {
 
-/// A certificate that is whatever bytes it was made from.
+/// A certificate of any bytes.
 class FakeCertificate : public trust::Certificate {
   public:
     explicit FakeCertificate(foundation::ByteView der, std::string summary = "certificate")
@@ -40,7 +40,7 @@ class FakePublicKey : public trust::PublicKey {};
 
 class FakeTrustService : public trust::TrustService {
   public:
-    /// What one call of evaluate() does, and what the trust object tells afterwards.
+    /// The result of one evaluate() call, and the later state of the trust object.
     struct Evaluation {
         trust::Status status = trust::kSuccess;
         trust::Verdict verdict = trust::Verdict::unspecified;
@@ -52,7 +52,7 @@ class FakeTrustService : public trust::TrustService {
         foundation::Data signature;
     };
 
-    // Answers. Of a list, each call takes the next entry and the last one stays; an empty list is success.
+    // Results. Each call takes a list's next entry, and the last one stays; an empty list is success.
     std::function<bool(foundation::ByteView)> parsesCertificate = [](foundation::ByteView) { return true; };
     trust::NamedPolicyOutcome namedPolicyOutcome = trust::NamedPolicyOutcome::unavailable;
     trust::PolicyRef namedPolicy;
@@ -98,7 +98,7 @@ class FakeTrustService : public trust::TrustService {
         return signatureError;
     }
 
-    /// A trust object as an HTTPS challenge carries one: it was not made by createTrust.
+    /// A trust object like one in an HTTPS challenge: not made by createTrust.
     std::shared_ptr<trust::Trust> makeTrust() { return std::make_shared<FakeTrust>(*this); }
 
   private:

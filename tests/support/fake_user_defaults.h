@@ -12,13 +12,13 @@
 
 namespace pinwell::test {
 
-/// Answers from the dictionaries in `domains`, else from what was registered, as the real service does.
+/// Returns values from the dictionaries in `domains`, else the registered ones, like the real service.
 class FakeUserDefaultsService final : public defaults::UserDefaultsService {
   public:
     std::unique_ptr<defaults::UserDefaults> openDomain(std::string_view domain) override;
 
     std::map<std::string, foundation::Dictionary, std::less<>> domains;
-    std::vector<std::string> opened;  // the domains asked for, in order
+    std::vector<std::string> opened;  // the opened domains, in order
 };
 
 }  // namespace pinwell::test

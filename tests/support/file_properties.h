@@ -1,5 +1,5 @@
-// Short words for making files of every kind and for looking at them. What cannot be done throws
-// std::system_error.
+// Short functions to make files of every kind and to read their properties. They throw std::system_error on
+// failure.
 #pragma once
 
 #include <sys/stat.h>
@@ -13,11 +13,11 @@ namespace pinwell::test {
 
 bool isSuperuser();
 
-/// Whom tests of permissions, which do not hold for the superuser, run as.
+/// The user for tests of permissions, which do not hold for the superuser.
 inline constexpr uid_t kOrdinaryUser = 65534;
 
-/// Makes that user the owner of all that is at `path` and below, where the superuser runs the tests; else it
-/// is their own already.
+/// If the superuser runs the tests, makes that user the owner of `path` and everything below it; otherwise it
+/// does nothing.
 void giveToOrdinaryUser(const std::string& path);
 
 struct stat statusOf(const std::string& path);
@@ -34,11 +34,11 @@ void setMode(const std::string& path, mode_t mode);
 void setAttribute(const std::string& path, const std::string& name, std::string_view value);
 std::optional<std::string> attribute(const std::string& path, const std::string& name);
 
-/// An access control list (acl(5), "system.posix_acl_access") that lets user 12345 read: rw-, r--, mask r--,
-/// ---.
+/// An access control list (acl(5), "system.posix_acl_access") that gives user 12345 read access: rw-, r--,
+/// mask r--, ---.
 std::string listThatLetsAnotherRead();
 
-/// Bytes without any regularity that a copy could live on.
+/// Bytes without any regularity that could hide a faulty copy.
 std::string irregularBytes(std::size_t count);
 
 }  // namespace pinwell::test

@@ -1,4 +1,4 @@
-// What a full disk would do to a write, without a volume of its own.
+// Simulates a full disk for writes, without a separate volume.
 #pragma once
 
 #include <sys/resource.h>
@@ -9,8 +9,8 @@
 
 namespace pinwell::test {
 
-/// While it lives, this process and those that it starts make no file longer than that many bytes. A write
-/// that would ends with EFBIG, and with SIGXFSZ where that is not ignored. One at a time.
+/// During its life, this process and its children cannot make a longer file. Such a write ends with EFBIG,
+/// and with SIGXFSZ unless the signal is ignored. One at a time.
 class FileSizeLimit {
   public:
     explicit FileSizeLimit(std::size_t bytes) {

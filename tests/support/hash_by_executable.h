@@ -1,5 +1,5 @@
-// Bundles whose code hash is what their executable holds: many artefacts with hashes of their own, without a
-// signature. From any thread.
+// Bundles whose code hash is the text in their executable: many artefacts with different hashes, without a
+// signature. For any thread.
 #pragma once
 
 #include <sys/stat.h>
@@ -19,8 +19,8 @@ namespace pinwell::test {
 
 inline constexpr std::size_t kBundleHashLength = 20;
 
-/// Returns when what is written gets another time than the file has: the clock of a file system may go in
-/// steps of some milliseconds.
+/// Returns when a new file would get another time than this file: the clock of a file system may have steps
+/// of some milliseconds.
 inline void waitForAnotherTimeThan(const std::string& file) {
     const std::string clock = file + ".clock";
     struct stat of {};
@@ -33,7 +33,7 @@ inline void waitForAnotherTimeThan(const std::string& file) {
     ::unlink(clock.c_str());
 }
 
-/// Writes the bundle, with another time than one that is there. The hash is `text`, filled up with dots.
+/// Writes the bundle, with another time than an existing one. The hash is `text`, filled up with dots.
 inline void writeBundle(const std::string& path, const std::string& text) {
     std::string hash = text;
     hash.resize(kBundleHashLength, '.');
@@ -46,7 +46,7 @@ inline void writeBundle(const std::string& path, const std::string& text) {
 
 class HashByExecutable : public FakeCodeSigningService {
   public:
-    /// The text of an executable that raises an exception in who asks for its hash.
+    /// The text of an executable that makes a query for its hash raise an exception.
     static constexpr const char* kRaises = "raises..............";
 
     codesign::Status createStaticCode(const foundation::URL& url, std::uint32_t,

@@ -86,7 +86,7 @@ std::string commonNameOf(const X509* certificate) {
     return length > 0 ? name.data() : "";
 }
 
-// Notes what the client offers and answers with what the options say (`argument`), offered or not.
+// Notes the client's offer and chooses the protocol of the options (`argument`), offered or not.
 int chooseProtocol(SSL* connection, const unsigned char** chosen, unsigned char* chosenLength,
                    const unsigned char* offered, unsigned int offeredLength, void* argument) {
     auto& record = *static_cast<RecordedConnection*>(SSL_get_app_data(connection));
@@ -303,7 +303,7 @@ struct HostileServer::Impl {
     void serve(FileDescriptor socket, std::size_t index, std::optional<Script> script);
 };
 
-// One connection, step by step. Every step answers whether the script may go on.
+// One connection, step by step. Every step returns whether the script continues.
 class ScriptRun {
   public:
     ScriptRun(HostileServer::Impl& server, FileDescriptor socket, std::size_t index)
@@ -389,7 +389,7 @@ class ScriptRun {
         return handshakeDone_;
     }
 
-    // The handshake is made in memory, so that what goes over the wire can be less than all of it.
+    // The handshake is made in memory, so that only a part of it can be sent.
     bool partOfHandshake() {
         handshakeTried_ = true;
         RecordedConnection record;
@@ -412,7 +412,7 @@ class ScriptRun {
         return sendOnSocket(flight);
     }
 
-    // Byte by byte: what stands behind the head is not this step's.
+    // Byte by byte, because the bytes after the head belong to another step.
     bool readPlainHead() {
         std::string head;
         while (!head.ends_with("\r\n\r\n")) {
@@ -452,7 +452,7 @@ class ScriptRun {
         return true;
     }
 
-    // Appends what comes next to the buffer.
+    // Appends the next bytes to the buffer.
     bool receive() {
         std::array<char, 16384> chunk{};
         std::size_t count = 0;
@@ -518,7 +518,7 @@ class ScriptRun {
         }
     }
 
-    // A close with unread input would be a reset, so the peer's end is waited for.
+    // A close with unread input would be a reset, so it waits for the peer's end.
     void closeOrderly(bool notify) {
         ended_ = true;
         if (notify && handshakeDone_ && !failed_) SSL_shutdown(connection_.get());
@@ -611,7 +611,7 @@ HostileServer::HostileServer(const ServerIdentity& identity, HostileServerOption
     SSL_CTX* const context = impl_->context.get();
     require(context != nullptr, "no TLS context");
     SSL_CTX_set_security_level(context,
-                               0);  // keys and versions that nobody should use are this server's trade
+                               0);  // this server also offers obsolete keys and versions
     require(SSL_CTX_set_min_proto_version(context, static_cast<int>(impl_->options.minimum)) == 1 &&
                 SSL_CTX_set_max_proto_version(context, static_cast<int>(impl_->options.maximum)) == 1,
             "the TLS versions cannot be set");

@@ -1,4 +1,4 @@
-// A TLS server on the loopback address that does exactly what its script says, well-behaved or not.
+// A TLS server on the loopback address that does exactly the steps of its script, valid or not.
 //
 //   HostileServer server(identityOf(ServerChain("localhost").issue()));
 //   server.enqueue(Script().respond({.status = 200, .body = "hello"}));      // the first connection
@@ -6,18 +6,18 @@
 //   ... fetch server.url("/path") twice ...
 //   EXPECT_EQ(server.requests().at(0).method, "POST");
 //
-// Each connection takes the next script that was enqueued. When none is left, the handler answers every
-// request (404 unless `setHandler` was called), so a test that wants an ordinary server writes only:
+// Each connection takes the next queued script. If none is left, the handler responds to every request (404
+// without `setHandler`). So a test of an ordinary server needs only:
 //
 //   server.setHandler([](const RecordedRequest& request) { return Response{.body = request.body}; });
 //
-// A script is a list of steps, done in order on that connection's own thread. The TLS handshake happens at
-// `handshake()`, or before the first step that needs it; what stands before it is on the bare connection.
-// When the steps are done the connection is closed in the orderly way. When a step fails, since the peer has
-// gone or the server is being destroyed, the connection is closed and what is left of its script is dropped.
+// A script is a list of steps, done in order on that connection's own thread. The TLS handshake is at
+// `handshake()`, or before the first step that needs it; steps before it use the bare connection. After the
+// last step the connection is closed in order. If a step fails, because the peer has gone or the server ends,
+// the connection is closed and the rest of its script is dropped.
 //
-// Stalling is an event, not a time: a script waits at a Gate until the test opens it (or the server ends),
-// and the test can wait until the script has got there.
+// A stall is an event, not a time: a script waits at a Gate until the test opens it (or the server ends). The
+// test can wait until the script has reached the gate.
 //
 // Bounds: a request of at most 80 MiB, an endless step of at most 256 MiB, 60 seconds of silence from the
 // peer, 256 connections. All functions may be called from any thread. The destructor breaks all connections
@@ -37,19 +37,19 @@ namespace pinwell::test {
 
 struct IssuedChain;
 
-/// What the server shows of itself, in PEM: the certificates leaf first, and the leaf's private key.
+/// The identity of the server, in PEM: the certificates, leaf first, and the leaf's private key.
 struct ServerIdentity {
     std::string certificateChain;
     std::string privateKey;
 };
 ServerIdentity identityOf(const IssuedChain& chain);
 
-/// Where a script stops until the test lets it go on. Copies are the same gate.
+/// A script stops at a gate until the test opens it. Copies are the same gate.
 class Gate {
   public:
     Gate();
 
-    /// Lets through whoever waits here, now and later.
+    /// Opens the gate for all waiting scripts, now and later.
     void open() const;
 
     /// Waits until a script has stopped here; false when that does not happen within a minute.
@@ -64,7 +64,7 @@ class Gate {
 
 using HeaderList = std::vector<std::pair<std::string, std::string>>;
 
-/// A request as it came in. The body is as long as Content-Length says; chunked requests are not understood.
+/// A received request. The body is as long as Content-Length says; chunked requests are not understood.
 struct RecordedRequest {
     std::string method;
     std::string target;   // as sent: "/path?query", or "host:port" of a CONNECT
@@ -76,8 +76,8 @@ struct RecordedRequest {
     std::optional<std::string> header(std::string_view name) const;
 };
 
-/// A well-formed answer. Content-Length (of the body) and "Connection: close" are added unless `headers` has
-/// fields of these names.
+/// A well-formed response. Content-Length (of the body) and "Connection: close" are added unless `headers`
+/// has fields of these names.
 struct Response {
     int status = 200;
     HeaderList headers = {};
@@ -87,46 +87,46 @@ struct Response {
     std::string bytes() const;
 };
 
-/// What a connection does.
+/// The steps of a connection.
 class Script {
   public:
     // On the bare connection, before the handshake.
-    Script& sendPlain(std::string bytes);  // what is sent instead of TLS
-    /// Reads up to the end of a request's head, as a proxy gets it; the request is recorded without a body.
+    Script& sendPlain(std::string bytes);  // sent instead of TLS
+    /// Reads up to the end of a request's head, like a proxy; the request is recorded without a body.
     Script& readPlainHead();
-    /// What a proxy does that lets the client through: reads its CONNECT and agrees. The server that the
-    /// client then talks to is this one, whatever host was asked for.
+    /// Acts as a proxy that lets the client through: reads its CONNECT and agrees. The client then talks to
+    /// this server, whatever host it requested.
     Script& acceptTunnel();
 
     Script& handshake();
-    /// Answers the client's hello with all that a server has to say in a handshake but its last byte. No step
-    /// that needs the handshake may follow.
+    /// Responds to the client's hello with the server's whole part of a handshake, except its last byte. No
+    /// step that needs the handshake may follow.
     Script& partOfHandshake();
 
-    /// Reads one request, head and body, and records it. Answers "Expect: 100-continue" with nothing.
+    /// Reads one request, head and body, and records it. Does not respond to "Expect: 100-continue".
     Script& readRequest();
     /// Reads up to the end of the request's head only; the request is recorded without a body.
     Script& readHead();
-    /// Reads up to the end of these bytes, 1 MiB at most, for what is not HTTP/1.
+    /// Reads up to the end of these bytes, 1 MiB at most, for input other than HTTP/1.
     Script& readUntil(std::string bytes);
 
-    /// Sends the bytes, as one TLS record where they fit.
+    /// Sends the bytes, as one TLS record if they fit.
     Script& send(std::string bytes);
-    /// Sends the bytes one by one, each a TLS record of its own.
+    /// Sends the bytes one by one, each in its own TLS record.
     Script& drip(std::string bytes);
     /// Sends the bytes again and again until the peer goes away, 256 MiB at most.
     Script& sendEndlessly(std::string bytes);
-    /// readRequest(), then the answer.
+    /// readRequest(), then the response.
     Script& respond(Response response);
 
     /// Stops here until the gate is opened.
     Script& waitFor(Gate gate);
-    /// Reads and drops whatever comes until the peer closes.
+    /// Reads and drops all input until the peer closes.
     Script& drain();
 
     /// Ends: TLS close_notify, then the connection (without a handshake: the connection).
     Script& close();
-    /// Ends without close_notify, as a cut connection looks.
+    /// Ends without close_notify, like a cut connection.
     Script& cut();
     /// Ends with a TCP reset.
     Script& reset();
@@ -145,16 +145,16 @@ enum class TLSVersion : std::uint16_t { tls10 = 0x0301, tls11 = 0x0302, tls12 = 
 struct HostileServerOptions {
     TLSVersion minimum = TLSVersion::tls12;
     TLSVersion maximum = TLSVersion::tls13;
-    bool requestsClientCertificate = false;  // asks for one; takes none for an answer
-    /// In PEM: asks for a certificate that this authority has issued, and ends the handshake without one.
+    bool requestsClientCertificate = false;  // requests one; requires none
+    /// In PEM: requires a certificate of this authority, and ends the handshake without one.
     std::string clientAuthority = {};
-    /// Chosen in the handshake even when the client did not offer it; empty: no answer to ALPN.
+    /// Chosen in the handshake even if the client did not offer it; empty: no ALPN response.
     std::string applicationProtocol = "http/1.1";
     bool offersSessionTickets = true;
     std::string address = "127.0.0.1";  // or "::1"
 };
 
-/// What is known of a connection once its handshake is done, or has failed.
+/// The properties of a connection after its handshake, completed or failed.
 struct RecordedConnection {
     bool handshakeDone = false;
     std::string serverName;                     // SNI; empty when none was sent
@@ -180,7 +180,7 @@ class HostileServer {
 
     void enqueue(Script script);
 
-    /// Answers the requests of connections for which no script is left. Runs on their threads, one at a time.
+    /// Sets the handler for connections without a script. It runs on their threads, one at a time.
     void setHandler(std::function<Response(const RecordedRequest&)> handler);
 
     std::vector<RecordedRequest> requests() const;

@@ -8,7 +8,7 @@
 
 namespace pinwell::test {
 
-/// Of an elliptic-curve key whose point is 04 x y: 02 or 03 and x; 06 or 07 and x y.
+/// For an elliptic-curve key whose point is 04 x y: 02 or 03 and x; 06 or 07 and x y.
 foundation::Data compressedPoint(foundation::ByteView info);
 foundation::Data hybridPoint(foundation::ByteView info);
 

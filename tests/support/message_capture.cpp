@@ -16,7 +16,7 @@ namespace pinwell::test {
 MessageCapture::MessageCapture(std::uint8_t verbosity)
     : file_(memfd_create("messages", MFD_CLOEXEC)), savedOutput_(-1), savedVerbosity_(verboseLevel) {
     if (file_ < 0) throw std::system_error(errno, std::generic_category(), "memfd_create");
-    std::fflush(stdout);  // GoogleTest's own lines stay where they belong
+    std::fflush(stdout);  // keeps GoogleTest's own lines in their order
     savedOutput_ = dup(STDOUT_FILENO);
     if (savedOutput_ < 0 || dup2(file_, STDOUT_FILENO) < 0)
         throw std::system_error(errno, std::generic_category(), "dup");

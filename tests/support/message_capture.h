@@ -1,4 +1,4 @@
-// What the message functions wrote, line by line.
+// The output of the message functions, line by line.
 #pragma once
 
 #include <cstdint>
@@ -9,7 +9,7 @@
 
 namespace pinwell::test {
 
-/// Takes standard output over for its lifetime and sets the verbosity; restores both. One at a time.
+/// Captures standard output during its life and sets the verbosity; restores both. One at a time.
 class MessageCapture {
   public:
     explicit MessageCapture(std::uint8_t verbosity);

@@ -1,5 +1,5 @@
-// Flat packages: an archive, and the trailers behind it, in the order of the calls. Without any call it is a
-// signed archive and nothing else.
+// Flat packages: an archive, and the trailers after it, in the order of the calls. Without any call it is
+// only a signed archive.
 #pragma once
 
 #include <cstdint>
@@ -14,7 +14,7 @@ using foundation::Data;
 
 inline constexpr std::uint16_t kUnknownTrailerType = 7;
 
-/// One record; valid, and of an unknown type, as it is.
+/// One record; valid by default, and of an unknown type.
 struct TrailerFields {
     std::string magic = "t8lr";
     std::uint16_t version = 1;
@@ -23,7 +23,7 @@ struct TrailerFields {
     std::uint32_t upperLength = 0;
 };
 
-/// Data and the record behind them.
+/// Data and the record after them.
 Data makeTrailer(const TrailerFields& fields, const Data& data = {});
 
 class PackageBuilder {
@@ -39,7 +39,7 @@ class PackageBuilder {
 
     std::string build() const;
 
-    /// Length of the archive alone, in bytes.
+    /// Length of the archive without trailers, in bytes.
     std::size_t archiveSize() const { return archive_.size(); }
 
   private:

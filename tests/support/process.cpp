@@ -64,7 +64,7 @@ class FileActions {
     posix_spawn_file_actions_t actions_{};
 };
 
-/// Default dispositions and an empty mask, whatever this program and its threads have made of theirs.
+/// Default dispositions and an empty mask, whatever the state of this program and its threads.
 class CleanSignals {
   public:
     CleanSignals() {
@@ -88,8 +88,8 @@ class CleanSignals {
     posix_spawnattr_t attributes_{};
 };
 
-/// The variables, with what makes a sanitizer's report the end of the child. Ours stand last, and the last
-/// one wins.
+/// The variables, with the sanitizers' settings that make a report end the child. Our settings are last, and
+/// the last one counts.
 std::vector<std::string> environmentList(const Environment& variables) {
     std::vector<std::string> list;
     for (const auto& [name, value] : variables) list.push_back(name + "=" + value);
@@ -108,7 +108,7 @@ std::vector<char*> pointersTo(std::vector<std::string>& texts) {
     return pointers;
 }
 
-/// Answers the end that the test reads, if it does.
+/// Returns the end that the test reads, if it does.
 FileDescriptor connectOutput(FileActions& actions, Output output, int descriptor, std::vector<Pipe>& pipes) {
     if (output == Output::closed) {
         actions.close(descriptor);
@@ -195,7 +195,7 @@ bool RunningProcess::State::drain(FileDescriptor& from, std::string& into) {
     return true;
 }
 
-// Takes in whatever comes next. False when the child has ended and said all, or when the deadline has passed.
+// Takes the next event. Returns false if the child has ended and its output is complete, or at the deadline.
 bool RunningProcess::State::step(Clock::time_point deadline) {
     const auto rest = std::chrono::duration_cast<std::chrono::milliseconds>(deadline - Clock::now());
     if (ended || rest.count() <= 0) return false;
@@ -206,7 +206,7 @@ bool RunningProcess::State::step(Clock::time_point deadline) {
         check(errno, "poll");
     if (waits[1].revents != 0 && !drain(output, result.output)) output = FileDescriptor();
     if (waits[2].revents != 0 && !drain(errors, result.errors)) errors = FileDescriptor();
-    // What the child wrote before its end is in the pipes by now: they are emptied first.
+    // All output before the child's end is in the pipes now: they are emptied first.
     if (waits[0].revents != 0 && waits[1].revents == 0 && waits[2].revents == 0) reap();
     return !ended;
 }

@@ -1,14 +1,14 @@
-// Programs run as their users run them: arguments and environment in, both outputs and the end out.
+// Programs run as their users run them: arguments and environment in; both outputs and the end out.
 //
 //   const ProcessResult result = runProcess({.executable = path, .arguments = {"staple", "Sample.app"}});
 //   EXPECT_EQ(result.exitStatus, 64);
 //
-// A child starts with the given environment alone (and what sanitizers need, see below), with default signal
-// dispositions, nothing blocked, and an empty standard input. Waiting is bounded by kProcessPatience; a child
+// A child starts with only the given environment (and the sanitizers' needs, see below), with default signal
+// dispositions, nothing blocked, and an empty standard input. kProcessPatience bounds every wait; a child
 // that outlives it is killed, and the test has failed. No child outlives its object.
 //
-// Under a sanitizer a report ends the child with kSanitizerStatus, which no program of ours uses, and stands
-// in `errors`: a test that compares the exit status cannot miss it.
+// Under a sanitizer, a report ends the child with kSanitizerStatus, which no program of ours uses, and is in
+// `errors`: a test that compares the exit status cannot miss it.
 #pragma once
 
 #include <chrono>
@@ -26,17 +26,17 @@ inline constexpr int kSanitizerStatus = 99;
 
 using Environment = std::map<std::string, std::string>;
 
-/// What an output of the child is connected to.
+/// The target of an output of the child.
 enum class Output {
     captured,
     closed,      // the descriptor is not open at all
-    brokenPipe,  // a pipe that nobody reads
+    brokenPipe,  // a pipe without a reader
     full,        // a device with no space left
 };
 
 struct Command {
     std::string executable;                   // a path; also the child's argv[0]
-    std::vector<std::string> arguments = {};  // behind argv[0]
+    std::vector<std::string> arguments = {};  // after argv[0]
     Environment environment = {};
     std::string workingDirectory = "/";
     bool hasInput = true;  // an empty one; otherwise the descriptor is not open
@@ -45,7 +45,7 @@ struct Command {
 };
 
 struct ProcessResult {
-    std::optional<int> exitStatus;  // nothing when a signal ended it
+    std::optional<int> exitStatus;  // `nullopt` if a signal ended it
     int signal = 0;
     std::string output;
     std::string errors;
@@ -53,7 +53,7 @@ struct ProcessResult {
     std::vector<std::string> outputLines() const;
 };
 
-/// The lines of a text, without their newlines. What stands behind the last newline is a line as well.
+/// The lines of a text, without their newlines. Text after the last newline is a line as well.
 std::vector<std::string> linesOf(std::string_view text);
 
 /// A child that runs beside the test. For one thread.
@@ -67,11 +67,11 @@ class RunningProcess {
     RunningProcess(const RunningProcess&) = delete;
     RunningProcess& operator=(const RunningProcess&) = delete;
 
-    /// Waits until a whole line of standard output is there that begins with `prefix`; answers the line, or
-    /// nothing when the child ends or patience does without it.
+    /// Waits for a whole line of standard output that begins with `prefix`. Returns the line, or `nullopt` if
+    /// the child ends or the wait times out.
     std::optional<std::string> waitForLine(std::string_view prefix);
 
-    /// The same for a line that holds `part` anywhere, as logs have it behind a time.
+    /// The same for a line with `part` anywhere, as in logs after a time.
     std::optional<std::string> waitForLineWith(std::string_view part);
 
     bool isRunning();
@@ -81,10 +81,10 @@ class RunningProcess {
 
     void sendSignal(int number);
 
-    /// Waits for its end. A child that had to be killed is a test failure, and so ends with SIGKILL.
+    /// Waits for its end. A child that had to be killed is a test failure, and ends with SIGKILL.
     ProcessResult wait();
 
-    /// What has come so far.
+    /// The result so far.
     const ProcessResult& resultSoFar() const noexcept;
 
   private:

@@ -8,7 +8,7 @@ namespace {
 
 void* allocate(std::size_t size) noexcept {
     if (!pinwell::test::mayAllocate(size)) return nullptr;
-    return std::malloc(std::max<std::size_t>(size, 1));  // none of 0 bytes: malloc may answer that with null
+    return std::malloc(std::max<std::size_t>(size, 1));  // never 0 bytes: malloc may then return null
 }
 
 void* allocateOrThrow(std::size_t size) {

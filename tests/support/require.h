@@ -1,4 +1,4 @@
-// The builders' way to give up: a step that must not fail throws, and the test that asked for it fails.
+// Failure of a builder: a step that must not fail throws, and the calling test fails.
 #pragma once
 
 #include <stdexcept>

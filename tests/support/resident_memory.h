@@ -1,4 +1,4 @@
-// How much memory this process has of its own.
+// The amount of memory that belongs to this process alone.
 #pragma once
 
 #include <cstddef>
@@ -7,7 +7,7 @@
 
 namespace pinwell::test {
 
-/// Bytes of anonymous pages that are resident: what address space alone takes does not count.
+/// Bytes of resident anonymous pages: reserved address space does not count.
 inline std::size_t residentMemory() {
     std::ifstream status("/proc/self/status");
     std::size_t kibibytes = 0;
@@ -16,7 +16,7 @@ inline std::size_t residentMemory() {
     return kibibytes * 1024;
 }
 
-/// What tests of long and empty inputs allow: the heap's own ups and downs, and no more.
+/// The allowance of tests with long and empty inputs: only the usual variation of the heap.
 inline constexpr std::size_t kLittleMemory = std::size_t{24} * 1024 * 1024;
 
 }  // namespace pinwell::test

@@ -56,7 +56,7 @@ Data superblobOver(ByteView code, const SignedImageParts& parts) {
 }
 
 Data imageAround(const Data& superblob, const SignedImageParts& parts) {
-    // A load command of which nobody makes anything fills more than a page.
+    // An unused load command fills more than a page.
     return ExecutableImageBuilder()
         .cpuType(parts.cpuType)
         .loadCommand(0x1B, Data(kPageSize, std::byte{0x11}))
@@ -68,8 +68,8 @@ Data imageAround(const Data& superblob, const SignedImageParts& parts) {
 }  // namespace
 
 Data signedImageOf(const SignedImageParts& parts) {
-    // The image states where its signature is and how long, and the signature covers that. A message's length
-    // may vary with its signature value, so that it may take a second try.
+    // The image states place and length of its signature, and the signature covers these fields. A message's
+    // length depends on its signature value, so this may need a second try.
     Data superblob = superblobOver(Data(kPageSize + 1), parts);
     for (;;) {
         const Data image = imageAround(superblob, parts);

@@ -1,5 +1,5 @@
-// Executable images whose page hashes are right, signed by a signer's message, with as many code directories
-// and components as a signature may have: what lumora-local's samples do not need.
+// Executable images with correct page hashes and a signer's message, with as many code directories and
+// components as a signature may have: forms that lumora-local's samples do not have.
 #pragma once
 
 #include <cstdint>
@@ -21,7 +21,7 @@ struct SignedImageParts {
     bool hasSigner = false;                      // a signer's message with a time stamp; otherwise ad hoc
     bool hasTimestamp = false;                   // of the signer's message
     std::map<std::uint32_t, Data> components{};  // blobs of special slots, beside the requirements
-    std::map<std::uint32_t, Data> outside{};     // what special slots cover elsewhere
+    std::map<std::uint32_t, Data> outside{};     // the contents outside the image that special slots cover
     Data padding{};                              // after the superblob, in the signature's area
 };
 

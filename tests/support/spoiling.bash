@@ -1,5 +1,5 @@
-# What the tests of checks share: faults are put into a copy of what is checked, and the check has to name each of them.
-# Sourced, after `set -euo pipefail`; makes the folder for the copy, and takes it away at the end.
+# Shared code of the tests of checks. They put faults into a copy of the checked files, and the check must name each fault.
+# Sourced, after `set -euo pipefail`; makes the folder for the copy, and removes it at the end.
 
 # shellcheck source=outcomes.bash
 . "$(dirname "${BASH_SOURCE[0]}")/outcomes.bash"
@@ -8,7 +8,7 @@ copy=$(mktemp -d)
 trap 'rm -rf "$copy"' EXIT
 complaints=()
 
-# spoil FILE EDIT COMPLAINT: edits a file of the copy, and what must be said of that.
+# spoil FILE EDIT COMPLAINT: edits a file of the copy, and records the expected complaint.
 spoil() {
   local before
   before=$(cat "$copy/$1")
@@ -17,13 +17,13 @@ spoil() {
   complaints+=("$3")
 }
 
-# expect_success COMMAND...: the check has nothing against the copy as it stands.
+# expect_success COMMAND...: the check finds no fault in the present copy.
 expect_success() {
   local said
   said=$("$@" 2>&1) || fail "complains without a cause: $said"
 }
 
-# expect_complaints COMMAND...: the check ends with 1, and with every complaint that is due since it was asked last.
+# expect_complaints COMMAND...: the check ends with 1, and with every complaint recorded since its last call.
 expect_complaints() {
   local status=0 said complaint
   [ ${#complaints[@]} -gt 0 ] || fail "nothing has been spoilt"
@@ -35,7 +35,7 @@ expect_complaints() {
   complaints=()
 }
 
-# stand_in FILE LINE...: a shell script in the copy, in the place of a program that is not to be run.
+# stand_in FILE LINE...: a shell script in the copy that replaces a program.
 stand_in() {
   mkdir -p "$(dirname "$copy/$1")"
   printf '%s\n' '#!/bin/sh' "${@:2}" > "$copy/$1"

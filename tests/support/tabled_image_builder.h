@@ -1,5 +1,5 @@
-// Disk images that list their blocks in a table with checksums: what verify/block_table.h reads. Sectors have
-// 512 bytes.
+// Disk images that list their blocks in a table with checksums, for verify/block_table.h. Sectors have 512
+// bytes.
 #pragma once
 
 #include <cstdint>
@@ -25,7 +25,7 @@ struct TrailerChecksums {
 /// An unsigned image of one table: data, property list, trailer.
 Data imageOfTable(ByteView table, ByteView data, const TrailerChecksums& checksums);
 
-/// An image of one table whose blocks are added one by one; valid as it is.
+/// An image of one table with blocks added one by one; valid by default.
 class TabledImageBuilder {
   public:
     TabledImageBuilder& block(std::uint32_t type, std::uint64_t sectors, const Data& packed,

@@ -1,8 +1,8 @@
-// A whole platform of fakes around a real directory: what a unit test of the tool runs on.
+// A whole platform of fakes around a real directory, for unit tests of the tool.
 //
-// Code signing, trust, sessions, user defaults and the system log answer what the test says; files and types
-// are real, below a temporary directory, with every file operation recorded. The end of the process is an
-// exception.
+// The test sets the results of code signing, trust, sessions, user defaults and the system log. Files and
+// types are real, below a temporary directory, with every file operation recorded. The end of the process is
+// an exception.
 #pragma once
 
 #include <optional>
@@ -20,7 +20,7 @@
 
 namespace pinwell::test {
 
-/// The process would have ended here.
+/// Thrown instead of the end of the process.
 struct ProcessExit {
     int status;
 };
@@ -35,7 +35,7 @@ class TestPlatform {
     /// The same with another code-signing service, the real one for instance.
     Platform servicesWith(codesign::CodeSigningService& other);
 
-    /// What `action` ends the process with; nothing when it returns.
+    /// The exit code of `action`; `nullopt` if it returns.
     template <class Action>
     std::optional<int> exitStatusOf(Action&& action) {
         try {
@@ -57,9 +57,9 @@ class TestPlatform {
     foundation::PlatformDirectory platformDirectory;
 };
 
-/// A ticket container that is well framed and whose payload lists `hashes` with algorithm 2, each of the
-/// payload's one hash length. Its certificates and signature are filler: only a trust service that accepts
-/// anything takes it.
+/// A well-framed ticket container whose payload lists `hashes` with algorithm 2, each of the payload's one
+/// hash length. Its certificates and signature are filler: only a trust service that accepts anything accepts
+/// it.
 foundation::Data unsignedTicket(const std::vector<foundation::Data>& hashes, std::uint32_t flags = 0);
 
 }  // namespace pinwell::test

@@ -14,8 +14,8 @@ using foundation::Data;
 
 constexpr std::size_t kSignatureFieldSize = 72;
 
-// The common sizes come up once in two to four signatures; a size that has not come up by then is not
-// possible.
+// The common sizes occur once in two to four signatures. A size that does not occur in all these attempts is
+// impossible.
 constexpr int kSigningAttempts = 1000;
 
 // X.690, 8.1.3, in the shortest form.

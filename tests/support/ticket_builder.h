@@ -1,12 +1,12 @@
-// Ticket payloads and the signed containers around them, made field by field.
+// Ticket payloads and the signed containers around them, field by field.
 //
 //   const Data payload = TicketPayloadBuilder().hashLength(32).entry(2, hashOf(7)).build();
 //   const IssuedChain chain = TicketChain().issue();
 //   const Data container = SatchelBuilder::of(chain, payload).version(2).build();
 //
-// What is not said is as it should be: counts and lengths follow from what was added, the signature covers
-// the finished container. An override changes its own field and nothing else, so one wrong field is one
-// visible line. Functions throw std::runtime_error for what cannot be built.
+// Everything is valid by default: counts and lengths follow from the added entries, the signature covers the
+// finished container. An override changes only its own field, so one wrong field is one visible line.
+// Functions throw std::runtime_error on failure.
 #pragma once
 
 #include <cstddef>
@@ -41,10 +41,10 @@ class TicketPayloadBuilder {
     TicketPayloadBuilder& revoked() { return flags(1); }
     TicketPayloadBuilder& signatureTime(std::uint64_t value);
 
-    /// Algorithm byte (written in version 2 alone) and hash.
+    /// Algorithm byte (written in version 2 only) and hash.
     TicketPayloadBuilder& entry(std::uint8_t algorithm, foundation::ByteView hash);
 
-    /// Bytes behind the entries that the count knows nothing of.
+    /// Bytes after the entries, which the count does not include.
     TicketPayloadBuilder& trailing(foundation::ByteView bytes);
 
     foundation::Data build() const;
@@ -77,16 +77,16 @@ class SatchelBuilder {
     SatchelBuilder& certificateBlockLength(std::uint32_t value);
     SatchelBuilder& payloadLength(std::uint32_t value);
 
-    /// Adds an element to the SEQUENCE: a certificate, or whatever shall stand in its place.
+    /// Adds an element to the SEQUENCE: a certificate, or any bytes in its place.
     SatchelBuilder& certificate(foundation::ByteView der);
     SatchelBuilder& certificates(std::vector<foundation::Data> list);
 
-    /// The SEQUENCE's own tag and length; the length in its shortest form, or any bytes in its place.
+    /// The SEQUENCE's own tag and length; the length in its shortest form, or any bytes instead.
     SatchelBuilder& outerTag(std::uint8_t value);
     SatchelBuilder& outerLength(std::size_t value);
     SatchelBuilder& outerLengthBytes(foundation::ByteView bytes);
 
-    /// Bytes behind the SEQUENCE, still in the block.
+    /// Bytes after the SEQUENCE, still in the block.
     SatchelBuilder& afterSequence(foundation::ByteView bytes);
 
     /// The whole block, in place of a SEQUENCE.
@@ -104,7 +104,7 @@ class SatchelBuilder {
     /// These bytes in place of a signature, padded with zeros.
     SatchelBuilder& signature(foundation::ByteView bytes);
 
-    /// The last byte of the signature field; there is padding to put it in only below a signature size of 72.
+    /// The last byte of the signature field; it is padding only if the signature has fewer than 72 bytes.
     SatchelBuilder& lastSignatureByte(std::uint8_t value);
 
     foundation::Data build() const;

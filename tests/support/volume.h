@@ -1,4 +1,4 @@
-// Volumes of a test's own, for what depends on the file system.
+// Separate volumes for tests that depend on the file system.
 #pragma once
 
 #include <optional>
@@ -8,11 +8,11 @@
 
 namespace pinwell::test {
 
-/// A fresh volume, mounted where only this process sees it, and gone with it at the latest.
+/// A fresh volume, mounted only for this process, and removed at the end of the process at the latest.
 class Volume {
   public:
-    /// `fileSystem` is how it is made: "xfs", "xfs -m reflink=0", "btrfs", "ext4", or "tmpfs" of one
-    /// MiB.
+    /// `fileSystem` gives the command to make it: "xfs", "xfs -m reflink=0", "btrfs", "ext4", or "tmpfs" of
+    /// one MiB.
     explicit Volume(const std::string& fileSystem);
     ~Volume();
     Volume(const Volume&) = delete;

@@ -1,7 +1,7 @@
-// The real tool, ended at each system call with which it may change something on the artefact's volume, on
-// file systems that clone and on one that does not. The network is real as well: the scripted server of this
-// process, over TLS. Afterwards the artefact is the old one or the new one; or its data are as they were, and
-// it can be put right with what lies on the disk.
+// The real tool, ended at each system call that may change the artefact's volume, on file systems with and
+// without clones. The network is real as well: the scripted server of this process, over TLS. Afterwards the
+// artefact is the old or the new one; or its data are unchanged, and the files on the disk are enough to
+// repair it.
 //
 // With PINWELL_EVERY_CALL in the environment, a run is ended at its reading calls too.
 #include <gmock/gmock.h>
@@ -26,7 +26,7 @@ namespace {
 
 using testing::AnyOf;
 
-// Volumes whose backing files are in memory: what is flushed is flushed at once.
+// Volumes whose backing files are in memory: a flush is immediate.
 class InMemory {
   private:
     std::optional<ScopedVariable> temporary_ =
@@ -59,13 +59,13 @@ class Crash : InMemory, public EndToEndTest, public testing::WithParamInterface<
 
     struct Scene {
         std::string path;  // the artefact's
-        Data ticket;       // that it gets
-        /// Puts everything as it was before a run.
+        Data ticket;       // the new ticket
+        /// Restores the state before a run.
         std::function<void()> prepare;
-        /// What is on the disk where the ticket goes; nothing when there is no file.
+        /// The bytes on the disk where the ticket goes; `nullopt` if there is no file.
         std::function<std::optional<std::string>()> look;
         std::string after;
-        /// Puts right what is neither the old one nor the new one.
+        /// Repairs an artefact that is neither the old nor the new one.
         std::function<void()> repair;
     };
 
@@ -176,7 +176,7 @@ class Crash : InMemory, public EndToEndTest, public testing::WithParamInterface<
         const std::string now = readFile(artefact.path);
         if (artefact.name.ends_with(".pkg")) {
             EXPECT_TRUE(now.starts_with(artefact.contents));
-            return;  // the next staple puts a chain of its own behind whatever is there
+            return;  // the next staple appends a new chain after any bytes
         }
         EXPECT_TRUE(now.starts_with(foundation::toString(irregularData(100'000))));
         restore(artefact.path, ".dmgData");
@@ -216,7 +216,7 @@ TEST_P(Crash, LosesNoPackage) {
     interruptStapleOf(signedPackage());
 }
 
-// Those behind the old ticket are moved in front of the new one.
+// Trailers after the old ticket are moved before the new one.
 TEST_P(Crash, LosesNoTrailersOfAPackage) {
     if (const auto reason = missing()) GTEST_SKIP() << *reason;
     const Artefact package = writeArtefact(signedPackage(), volume_ / "Sample.pkg");
@@ -319,7 +319,7 @@ TEST_P(ChangedWhileRead, AFileThatGrowsIsNotWritten) {
     });
 }
 
-// The way in place has no second look: what changes between the look and the write is written to.
+// The write in place does not check again: a change between the check and the write is not noticed.
 INSTANTIATE_TEST_SUITE_P(ByClone, ChangedWhileRead, testing::Values("xfs"),
                          [](const auto& volume) { return std::string(volume.param); });
 

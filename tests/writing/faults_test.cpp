@@ -1,9 +1,8 @@
-// Every way to write an artefact, with each of its file calls failing in each way: what is on the disk
-// afterwards, and what the tool says.
+// Every way to write an artefact, with each of its file calls failing in each way: the bytes on the disk
+// afterwards, and the tool's messages.
 //
-// An artefact that is replaced by a rewritten clone is the old one or the new one. One that is written in
-// place has all its data, whatever has become of its tail, and what it takes to put the tail right lies on
-// the disk.
+// An artefact replaced by a rewritten clone is the old one or the new one. An artefact written in place keeps
+// all its data. If its tail is damaged, the files on the disk are enough to repair it.
 #include <cerrno>
 #include <filesystem>
 #include <functional>
@@ -33,17 +32,17 @@ using testing::Contains;
 using testing::IsEmpty;
 using testing::Not;
 
-// What is written, as one file.
+// A written artefact, as one file.
 struct Subject {
     std::string name;
-    std::string path;  // what the tool is given
-    std::string file;  // what is written: the file itself, or a bundle's ticket
+    std::string path;  // the tool's argument
+    std::string file;  // the written file: the artefact itself, or a bundle's ticket
     std::string data;  // the part of the file that is not the ticket's; never written
     Data hash;
-    std::function<std::optional<std::string>(const std::optional<Data>&)> contentsWith;  // nothing: no file
+    std::function<std::optional<std::string>(const std::optional<Data>&)> contentsWith;  // `nullopt`: no file
     bool isBundle = false;
     bool isImage = false;
-    /// When it is not the same with the new ticket as it was with the old one.
+    /// If the new ticket's result differs from the old one's.
     std::function<std::string(const std::optional<Data>&)> afterWith = {};
 };
 
@@ -84,7 +83,7 @@ Subject fileIn(const std::string& directory, const Artefact& artefact, const std
 struct Job {
     std::string name;
     std::optional<Data> before;
-    std::optional<Data> after;  // nothing: the ticket is deleted
+    std::optional<Data> after;  // `nullopt`: the ticket is deleted
 };
 
 std::vector<Job> jobsFor(const Subject& subject) {
@@ -134,7 +133,7 @@ std::vector<std::string> pathsIn(const std::string& directory, std::string_view 
     return paths;
 }
 
-// A failed write is 73, and one of these says why.
+// A failed write is 73, with one of these messages as the reason.
 bool saysWhyItWasNotWritten(const Outcome& outcome) {
     for (const char* beginning :
          {"Fatal error while ", "All that work and I can't open ", "Could not create file handle to ",
@@ -156,13 +155,13 @@ struct Tally {
     std::size_t runs = 0;
     std::size_t kept = 0;      // the artefact was the old one afterwards
     std::size_t written = 0;   // the new one
-    std::size_t appended = 0;  // the old one with a second chain behind it
-    std::size_t repaired = 0;  // in between, and was put right
+    std::size_t appended = 0;  // the old one with a second chain after it
+    std::size_t repaired = 0;  // in between, and repaired
 };
 
 class WriteFaults : public testing::TestWithParam<const char*> {
   protected:
-    // Stands where artefacts go, and says how they are written there.
+    // The file system of the artefacts, which determines the way of writing.
     static std::string fileSystem() { return GetParam(); }
     static bool clones() { return fileSystem() == "xfs"; }
 
@@ -236,8 +235,8 @@ class WriteFaults : public testing::TestWithParam<const char*> {
         const auto after = afterwards(subject, job);
         const auto now = contentsOf(subject.file);
         if (outcome.status == kExitOK) {
-            // A swap that failed leaves the file that was there, as a rule, which may well carry a valid
-            // ticket; a chain that could not be read stays, and gets another behind it.
+            // A failed swap usually leaves the old file, which may have a valid ticket; an unreadable chain
+            // stays, and gets another one after it.
             EXPECT_TRUE(now == after || (now == before && outcome.says(kSwapFailed)) ||
                         isAppended(job, before, now));
         } else {
@@ -298,7 +297,7 @@ class WriteFaults : public testing::TestWithParam<const char*> {
             EXPECT_TRUE(readFile(subject.file) == afterwards(subject, job));
             return;
         }
-        // A package's tail is the ticket and nothing else, which is saved: the same run, once more.
+        // A package's tail is only the ticket, which is saved: the same run, once more.
         if (job.after) {
             EXPECT_EQ(readFile(temporary_ + "/REQUEST.ticket"), foundation::toString(*job.after));
         }
@@ -308,7 +307,7 @@ class WriteFaults : public testing::TestWithParam<const char*> {
     }
 
   private:
-    // Volumes whose backing files are in memory: what is flushed is flushed at once.
+    // Volumes whose backing files are in memory: a flush is immediate.
     std::optional<ScopedVariable> inMemory_ =
         std::filesystem::is_directory("/dev/shm")
             ? std::optional<ScopedVariable>(std::in_place, "TMPDIR", "/dev/shm")
@@ -333,7 +332,7 @@ class WriteFaults : public testing::TestWithParam<const char*> {
     }
 };
 
-// A bundle's ticket goes to the trash as a file, which is no write.
+// A bundle's ticket goes to the trash as a file, without a write.
 class DeletionFaults : public testing::Test {
   protected:
     struct Deletion {
@@ -365,7 +364,7 @@ class DeletionFaults : public testing::Test {
         writeFile(bundle_.file, ticket_);
     }
 
-    // What the bundle consists of besides its ticket.
+    // The bundle's files except its ticket.
     std::map<std::string, std::string> rest() const {
         std::map<std::string, std::string> files;
         for (const auto& entry : std::filesystem::recursive_directory_iterator(bundle_.path))
@@ -422,7 +421,7 @@ TEST_F(DeletionFaults, LeaveABundlesTicketWholeInItsPlaceOrInTheTrash) {
                 EXPECT_FALSE(deletion.done);
                 EXPECT_TRUE(outcome.status == kExitNoInput || outcome.says(kNotTrashed));
             } else {
-                // Where it went is asked once it has gone.
+                // The call for its new place comes after the move.
                 EXPECT_TRUE(deletion.done || failed == "readlink");
                 EXPECT_TRUE(outcome.says(deletion.done ? kTrashed : kNotTrashed));
             }
@@ -470,7 +469,7 @@ TEST_P(WriteFaults, LoseNoPackage) {
     run([](const std::string& place) { return fileIn(place, signedPackage(sampleData()), "package", {}); });
 }
 
-// Those behind the old ticket are moved in front of the new one.
+// Trailers after the old ticket are moved before the new one.
 TEST_P(WriteFaults, LoseNoTrailersOfAPackage) {
     run([](const std::string& place) {
         const std::string archive = signedPackage(sampleData()).contents;

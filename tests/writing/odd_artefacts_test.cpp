@@ -1,5 +1,5 @@
-// What is not what its name says, or lies where it cannot be written: a clean end each time, with an exit
-// code and a line that tells, never a signal, never a wait.
+// Files that differ from their names, or whose place is not writable. Each run ends with an exit code and a
+// line that explains it, never with a signal or a wait.
 #include <fcntl.h>
 #include <gmock/gmock.h>
 #include <linux/fs.h>
@@ -35,7 +35,7 @@ class OddArtefact : public EndToEndTest {
   protected:
     std::string path(std::string_view name) const { return directory / ("builds/" + std::string(name)); }
 
-    /// Both operations end so, and say so.
+    /// Both operations end with this status, and with these messages.
     void expectBoth(const std::string& item, int status,
                     const testing::Matcher<std::vector<std::string>>& lines) {
         EXPECT_THAT(pinwell({"staple", item}), Ended(status, lines)) << item;
@@ -50,11 +50,11 @@ class OddArtefact : public EndToEndTest {
         expectBoth(item, 66, ElementsAre("Processing: " + item));
     }
 
-    /// By somebody whom permissions hold for, and to whom all in the test's directory belongs.
+    /// Run by an ordinary user, for whom permissions hold, and who owns all files in the test's directory.
     ProcessResult stapleAsOrdinaryUser(const std::string& item) const {
         Command staple = command({"staple", item});
         if (!isSuperuser()) return runProcess(staple);
-        // Where the build stands need not be open to everybody.
+        // Other users may have no access to the build folder.
         const std::string program = directory / "pinwell";
         std::filesystem::copy_file(PINWELL_PROGRAM, program, std::filesystem::copy_options::skip_existing);
         giveToOrdinaryUser(directory.path());
@@ -65,8 +65,8 @@ class OddArtefact : public EndToEndTest {
         return runProcess(staple);
     }
 
-    /// Moves the item so far down that its path has that length, and answers the path. It is its directories
-    /// that are put one into the other, so that no path on the way is too long.
+    /// Moves the item down until its path has that length, and returns the path. The directories are moved
+    /// into one another, so no intermediate path is too long.
     std::string moveDown(const std::string& item, std::size_t length) const {
         const std::string top = directory / "deep";
         const std::string outer = directory / "outer";
@@ -75,7 +75,7 @@ class OddArtefact : public EndToEndTest {
         std::filesystem::rename(item, top + way);
         for (std::size_t rest = length - top.size() - way.size(); rest > 0;) {
             std::size_t part = std::min<std::size_t>(rest, NAME_MAX + 1);
-            if (rest - part == 1) --part;  // which a slash would fill alone
+            if (rest - part == 1) --part;  // only a slash would fill it
             rest -= part;
             const std::string name = '/' + std::string(part - 1, 'd');
             std::filesystem::create_directory(outer);
@@ -212,7 +212,7 @@ TEST_F(OddTicketPlace, ThatIsALinkIsLeftAlone) {
     EXPECT_EQ(readFile(path("elsewhere")), "kept");
 }
 
-// A file's attribute, of which only some file systems know.
+// A file's attribute that only some file systems support.
 class Immutable {
   public:
     explicit Immutable(const std::string& path) : file_(open(path.c_str(), O_RDONLY | O_CLOEXEC)) {
@@ -238,7 +238,7 @@ class Immutable {
     bool set_ = false;
 };
 
-// A file or, since a bundle's ticket is one that is removed and made, that one's directory.
+// A file. For a bundle, whose ticket is a file that is removed and made, its directory.
 class WriteProtected {
   public:
     WriteProtected(const Artefact& artefact, mode_t mode)
@@ -269,7 +269,7 @@ class Unwritable : public OddArtefact, public testing::WithParamInterface<Artefa
         serveTicket(sealed(artefact.payload()));
         return artefact;
     }
-    /// What of an artefact has the longest path.
+    /// The item of an artefact with the longest path.
     std::string innermost() const { return made.isBundle() ? kExecutableInBundle : ""; }
 
     Artefact putAtPathOf(std::size_t length) {
@@ -304,7 +304,7 @@ class Unwritable : public OddArtefact, public testing::WithParamInterface<Artefa
             clonesLeftBehind);
         EXPECT_THAT(names, ElementsAre(made.name));
     }
-    /// A swap into place that fails is told from what is found there afterwards.
+    /// A failed swap is recognised by the file that is there afterwards.
     void expectNotReplaced(const Artefact& artefact) {
         const std::string processing = "Processing: " + artefact.path;
         EXPECT_THAT(
@@ -345,8 +345,8 @@ TEST_P(Unwritable, AWriteProtectedFileStaysAsItIsWhereItCannotBeCloned) {
     expectProtectedOn("tmpfs", 0);
 }
 
-// A clone could well take its place; but it is protected as well, and whoever did that meant the artefact. A
-// clone that was not written is left behind.
+// A clone could replace it; but it is protected as well, and the protection is for the artefact. An unwritten
+// clone remains.
 TEST_P(Unwritable, AWriteProtectedFileStaysAsItIsWhereItCanBeCloned) {
     expectProtectedOn("xfs", made.isBundle() ? 0 : 2);
 }
@@ -358,7 +358,7 @@ TEST_P(Unwritable, AFullVolumeKeepsTheFileAsItIs) {
     // As long as whole pages are: not a byte of it finds room in the last one.
     while (artefact.contents.size() % 4096 != 0 && artefact.name.ends_with("pkg")) artefact.contents += '\0';
     artefact = writeArtefact(artefact, volume / made.name);
-    // What is removed makes room: a bundle that is to find none has no ticket yet.
+    // Removing a ticket frees space: a bundle for a full disk has no ticket yet.
     if (artefact.isBundle()) std::filesystem::remove(artefact.file());
     const auto ticketFile = [&] {
         return exists(artefact.file()) ? std::optional(readFile(artefact.file())) : std::nullopt;
@@ -372,7 +372,7 @@ TEST_P(Unwritable, AFullVolumeKeepsTheFileAsItIs) {
         while (write(file.get(), filler.data(), size) > 0) {
         }
     const ProcessResult result = pinwell({"staple", artefact.path});
-    // An image may have a page of its own left over that is room enough.
+    // An image may have enough room left in its own last page.
     if (result.exitStatus != 0) {
         EXPECT_THAT(result, Refused(artefact));
         EXPECT_TRUE(ticketFile() == before);
@@ -434,8 +434,8 @@ INSTANTIATE_TEST_SUITE_P(OfEveryKind, Unwritable,
                          testing::Values(&signedImage, &unsignedImage, &signedPackage, &signedBundle),
                          [](const auto& kind) { return kind.param({}).kind(); });
 
-// As everywhere, who may change a directory may remove what is in it.
-// Its path is not too long, what is in it is out of reach.
+// As everywhere, a user with the right to change a directory may remove its contents.
+// Its path is not too long, but the executable in it is out of reach.
 TEST_F(OddArtefact, ABundleWhoseExecutableLiesPastTheLimitOfPathsHasNoHash) {
     const std::string deep = moveDown(bundle, PATH_MAX - std::string_view(kExecutableInBundle).size());
     expectUnreadable(deep);
@@ -465,7 +465,7 @@ TEST_F(OddArtefact, AFileThatGrowsWhileItIsStapledIsRefused) {
     EXPECT_TRUE(readFile(image.path) == image.contents + std::string(1, '\0'));
 }
 
-// A signed image whose data are a hole of 8 TiB: nothing of it is read.
+// A signed image whose data are a hole of 8 TiB: none of the data are read.
 TEST_F(OddArtefact, ASignedImageOf8TiBIsStapledWithoutBeingRead) {
     constexpr std::uint64_t kSize = 8ULL << 40U;
     const Volume volume("xfs");

@@ -1,5 +1,4 @@
-// scripts/restore-artefact: what it puts right is tested where images are left half written (faults and
-// crashes); here, what it does not touch.
+// scripts/restore-artefact: the cases that it refuses. The tests of faults and crashes cover its repairs.
 #include <gtest/gtest.h>
 
 #include <filesystem>
@@ -21,7 +20,7 @@ class RestoreArtefact : public testing::Test {
                            .workingDirectory = directory.path()});
     }
 
-    // As a write in place saves it: what stands behind the image's data.
+    // Like a write in place: saves the bytes after the image's data.
     void writeCopy(const std::string& bytes) const { writeFile(copy, bytes); }
 
     void expectRefused(int status) const {
@@ -131,7 +130,7 @@ TEST_F(RestoreArtefact, RefusesAPlaceThatNoFileReaches) {
 
 class RestorePackage : public RestoreArtefact {
   protected:
-    // As a write in place saves them: the 16 bytes that the trailers belong behind, then the trailers.
+    // Like a write in place: saves the 16 bytes before the trailers, then the trailers.
     static PackageBuilder chain() { return PackageBuilder().archive({}).terminator(); }
     const std::string archive = signedPackage(data).contents;
     const std::string stapledPackage = archive + chain().unknown("KEPT").ticket("TICKET").build();

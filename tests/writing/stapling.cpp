@@ -15,7 +15,7 @@ bool Outcome::says(std::string_view beginning) const {
 
 void PrintTo(const Outcome& outcome, std::ostream* stream) {
     *stream << "a run that ended with " << outcome.status << " and said";
-    // The end tells enough.
+    // The last lines are enough.
     const std::size_t first = outcome.lines.size() - std::min<std::size_t>(outcome.lines.size(), 5);
     for (std::size_t i = first; i < outcome.lines.size(); ++i) *stream << "\n  " << outcome.lines[i];
 }

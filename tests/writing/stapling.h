@@ -1,5 +1,5 @@
-// Runs of the tool in the test's own process and thread: the real file service and code-signing service, the
-// test in the place of the network, and a trust service that accepts any ticket.
+// Runs of the tool in the test's own process and thread: the real file service and code-signing service. The
+// test replaces the network, and the trust service accepts any ticket.
 #pragma once
 
 #include <memory>
@@ -13,22 +13,22 @@
 
 namespace pinwell::test {
 
-/// What came of a run.
+/// The outcome of a run.
 struct Outcome {
     int status = 0;
     std::vector<std::string> lines;  // of a verbose run
 
-    /// Whether one of the lines begins so.
+    /// Whether one of the lines begins with this text.
     bool says(std::string_view beginning) const;
 };
 void PrintTo(const Outcome& outcome, std::ostream* stream);
 
 class Stapling {
   public:
-    /// `temporary` is where tickets and debug copies go.
+    /// `temporary` is the directory of tickets and debug copies.
     explicit Stapling(const std::string& temporary);
 
-    /// `pinwell staple PATH`, from the first look at the path to the last line.
+    /// `pinwell staple PATH`, from opening the path to the last line.
     Outcome staple(const std::string& path, const Data& ticket);
 
     /// Removes the ticket of an image or a package.

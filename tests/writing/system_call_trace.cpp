@@ -20,7 +20,7 @@
 namespace pinwell::test {
 namespace {
 
-// Where a call's file stands among its arguments.
+// The position of a call's file among its arguments.
 enum class File { path, descriptor, directoryAndPath };
 
 struct Call {
@@ -87,7 +87,7 @@ std::string textAt(pid_t thread, std::uint64_t address) {
     const auto page = static_cast<std::uint64_t>(sysconf(_SC_PAGESIZE));
     while (text.size() < PATH_MAX) {
         const std::uint64_t from = address + text.size();
-        std::vector<char> piece(page - from % page);  // what is mapped is mapped by pages
+        std::vector<char> piece(page - from % page);  // memory is mapped by pages
         iovec local{piece.data(), piece.size()};
         // NOLINTNEXTLINE: an address of another process is a number here
         iovec remote{reinterpret_cast<void*>(from), piece.size()};
@@ -150,10 +150,10 @@ class Trace {
         const pid_t child = fork();
         if (child < 0) fail("fork");
         if (child > 0) return child;
-        // Nothing but system calls from here on: other threads may have held any lock.
+        // Only system calls from here on: other threads may have held any lock.
         const int nothing = open("/dev/null", O_RDWR);
         for (const int stream : {0, 1, 2}) dup2(nothing, stream);
-        // A test run in the background or under nohup(1) has handed down what it ignores.
+        // A test run in the background or under nohup(1) passes its ignored signals on.
         for (const int number : {SIGHUP, SIGINT, SIGTERM}) std::signal(number, SIG_DFL);
         if (chdir(command.workingDirectory.c_str()) != 0 || ptrace(PTRACE_TRACEME, 0, nullptr, nullptr) != 0)
             _exit(127);
@@ -163,7 +163,7 @@ class Trace {
     }
 
     void proceed(pid_t thread, int signal) {
-        // A thread that has been killed meanwhile is not there any more; its end will be reported.
+        // A killed thread no longer exists; its end will be reported.
         if (ptrace(PTRACE_SYSCALL, thread, nullptr, static_cast<long>(signal)) != 0 && errno != ESRCH)
             fail("ptrace");
     }

@@ -1,10 +1,10 @@
-// A program run under ptrace(2) and stopped at one of its system calls, for something to happen there.
+// A program run under ptrace(2) and stopped at one of its system calls, where the test acts.
 //
 //   const TracedRun run = interruptRun(command, {.directory = volume.path()}, 17, sending(SIGKILL));
 //
-// The calls that count are those that touch files below one directory: by a path, or by a descriptor that
-// leads there. It happens when the call has been entered and not begun: SIGKILL leaves on the disk what the
-// calls before it have made, and nothing of this one.
+// Only calls on files below one directory count: by a path, or by a descriptor below it. The program stops
+// after it has entered the call and before the call begins. So SIGKILL leaves the results of the earlier
+// calls on the disk, and nothing of this one.
 #pragma once
 
 #include <cstddef>
@@ -18,32 +18,32 @@ namespace pinwell::test {
 
 struct TracedCalls {
     std::string directory;
-    /// Count only calls that may change something on the disk. Between two of them the disk stays as it is,
-    /// so that a run ended at each of them has been ended everywhere that makes a difference.
+    /// Count only calls that may change the disk. Between two of them the disk stays the same, so ending a
+    /// run at each of them covers every different state.
     bool changesOnly = true;
 };
 
 struct TracedRun {
-    std::optional<std::string> interruptedAt;  // the call's name; nothing: the run had fewer calls
-    std::optional<int> exitStatus;             // nothing when a signal ended it
+    std::optional<std::string> interruptedAt;  // the call's name; `nullopt`: the run had fewer calls
+    std::optional<int> exitStatus;             // `nullopt` if a signal ended it
     int signal = 0;
 };
 
-/// What happens; it is given the number of the process and of its thread that stands still at the call. The
-/// other threads go on.
+/// Acts on the stopped program. The arguments are its process and the thread at the call. The other threads
+/// continue.
 using Interruption = std::function<void(int process, int thread)>;
 
-/// The signal comes to the thread at the call. Sent to the process, the kernel might choose another thread: a
-/// traced one takes it when it gets a processor, and until then the first may reach the end of the program.
+/// The signal is sent to the thread at the call. For a signal to the process, the kernel may choose another
+/// thread. That one takes it when it gets a processor, perhaps after the first has ended the program.
 Interruption sending(int signal);
 
-/// Runs the command (its outputs go nowhere) and interrupts it at the call of that number, counted from 0.
-/// From one thread; the process must have no other children meanwhile. Throws std::system_error when the
-/// program cannot be started, or not be traced.
+/// Runs the command (its outputs are dropped) and interrupts it at the call of that number, counted from 0.
+/// From one thread; the process must have no other children during it. Throws std::system_error if the
+/// program cannot be started or traced.
 TracedRun interruptRun(const Command& command, const TracedCalls& calls, std::size_t number,
                        const Interruption& interruption);
 
-/// Why that cannot be done here; nothing when it can.
+/// Why tracing is impossible here; `nullopt` if it is possible.
 std::optional<std::string> tracingMissing();
 
 }  // namespace pinwell::test
