@@ -40,7 +40,7 @@ class Acceptance : public EndToEndTest {
     SatchelBuilder container(const Data& contents) const { return SatchelBuilder::of(ticketChain, contents); }
 };
 
-// What a ticket lists.
+// The hashes of a ticket.
 
 TEST_F(Acceptance, ATicketThatListsOtherSoftwareIsRefused) {
     EXPECT_THAT(stapleTicket(ticketForOthers()), Refused());
@@ -82,7 +82,7 @@ TEST_F(Acceptance, AFortyEightByteEntryMatchesNoTwentyByteHash) {
     EXPECT_THAT(stapleTicket(sealed(TicketPayloadBuilder().hashLength(48).entry(2, longer))), Worked());
 }
 
-// Who signed it.
+// The signer of a ticket.
 
 TEST_F(Acceptance, ATicketOfAnotherAuthorityIsRefused) {
     TicketChain stranger;
@@ -246,11 +246,11 @@ TEST_F(Acceptance, ATicketFileOfAnEarlierRunIsReplaced) {
     EXPECT_EQ(keptTicket(), foundation::toString(genuine));
 }
 
-// A file that changes while the service is asked.
+// A file that changes during the lookup.
 
 class ChangingFile : public Acceptance {
   protected:
-    /// What the file becomes between the lookup's request and its answer.
+    /// The file's change between the lookup's request and its response.
     template <class Change>
     ProcessResult stapleWhile(Change change) {
         const Gate gate;

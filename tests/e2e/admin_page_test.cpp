@@ -1,7 +1,8 @@
 // The page for people of the administration listener, from the real service and in a browser.
 //
-// The browser has no certificate. A bridge has: it asks the service over TLS and hands status, headers and
-// body of each answer on unchanged, except where a test says so. Skipped without Chromium.
+// The browser has no certificate. A bridge with a certificate sends its requests to the service over TLS. It
+// passes status, headers and body of each response on unchanged, unless a test changes them. Skipped without
+// Chromium.
 #include <httplib.h>
 
 #include <filesystem>
@@ -37,7 +38,7 @@ class Bridge {
         port_ = server_.bind_to_any_port("127.0.0.1");
         if (port_ <= 0) throw std::runtime_error("no port for the bridge");
         thread_ = std::thread([this] { server_.listen_after_bind(); });
-        while (!server_.is_running()) std::this_thread::yield();  // stop() would have no effect before
+        while (!server_.is_running()) std::this_thread::yield();  // before that, stop() would have no effect
     }
     ~Bridge() {
         server_.stop();
@@ -49,7 +50,7 @@ class Bridge {
     std::string url(const std::string& target) const {
         return "http://127.0.0.1:" + std::to_string(port_) + target;
     }
-    /// Puts markup at the end of each page, with or without the policy that came with the page.
+    /// Adds markup at the end of each page, with or without the page's policy.
     void add(std::string markup, bool keepsPolicy) {
         const std::lock_guard lock(mutex_);
         added_ = std::move(markup);
@@ -137,7 +138,7 @@ class AdminPage : public AdminServiceTest {
     ProcessResult browser(std::vector<std::string> arguments) const {
         return browse(command({}), directory.path(), std::move(arguments));
     }
-    /// The document as it is once the browser has made all that it will make of it.
+    /// The final document in the browser.
     std::string documentAt(const std::string& target, std::vector<std::string> options = {}) const {
         options.insert(options.end(), {"--dump-dom", bridge->url(target)});
         const ProcessResult result = browser(std::move(options));
@@ -177,7 +178,7 @@ TEST_F(AdminPage, LeadsFromTheSearchToTheHistoryOfARecord) {
     EXPECT_THAT(page, AllOf(HasSubstr("<h3>Issued</h3>"), HasSubstr("<h3>Revoked</h3>"),
                             HasSubstr("the key was lost"), HasSubstr("<dd>compromised</dd>")));
     EXPECT_EQ(titleOf(page), "Revoked: " + label + " - Record service");
-    // Nothing else was loaded.
+    // No other request was sent.
     EXPECT_THAT(bridge->targets(),
                 Each(testing::AnyOf("/", "/style.css", "/favicon.ico", StartsWith("/records"))));
 }
@@ -200,7 +201,7 @@ TEST_F(AdminPage, RunsNothingAndLoadsNothingWhateverLabelsAre) {
     }
     EXPECT_THAT(bridge->targets(), Not(Contains("/loaded")));
 
-    // Were something to get into the page, its policy would still allow neither.
+    // Even if something got into the page, its policy would allow neither.
     bridge->add(markup, true);
     EXPECT_THAT(documentAt("/"),
                 AllOf(HasSubstr("<img"), HasSubstr("<title>Search - Record service</title>")));

@@ -1,4 +1,4 @@
-// pinwell-ticket request against the real service: what it issues, refuses and notes.
+// pinwell-ticket request against the real service: tickets, refusals and the log.
 #include <csignal>
 
 #include "admin_service.h"
@@ -24,7 +24,7 @@ class AdminRequest : public AdminServiceTest {
         serve();
     }
 
-    /// The log's actions, with who has done them.
+    /// The log's actions, with their actors.
     std::vector<std::string> log() const {
         const auto document =
             foundation::parseJSON(foundation::asBytes(lumora({"log", serviceDirectory, "--json"}).output));

@@ -1,4 +1,4 @@
-// A record service of our own with its administration listener, and clients that have certificates.
+// A record service of the test with its administration listener, and clients with certificates.
 #pragma once
 
 #include <string>

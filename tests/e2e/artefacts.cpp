@@ -19,7 +19,7 @@ using foundation::ByteWriter;
 constexpr std::uint8_t kSHA1 = 1;
 constexpr std::uint8_t kSHA256 = 2;
 
-/// The code directory that stands for an unsigned image: SHA-256 of its data, its trailer and the empty
+/// The synthetic code directory of an unsigned image: SHA-256 of its data, its trailer and the empty
 /// requirements.
 Data madeUpCodeDirectory(const Data& data, const Data& trailer) {
     return ByteWriter()

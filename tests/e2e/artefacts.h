@@ -1,12 +1,12 @@
-// Disk images, flat packages and bundles on the disk, with what a test needs to know about them: their bytes,
-// the hash that a ticket lists for them, and what they look like once a ticket is stapled to them.
+// Disk images, flat packages and bundles on the disk, with the facts that tests need: their bytes, the hash
+// that a ticket lists for them, and their contents after a staple.
 //
 //   const Artefact image = writeArtefact(signedImage(), directory / "builds/Sample.dmg");
 //   serveTicket(sealed(image.payload()));
 //   EXPECT_THAT(pinwell({"staple", image.path}), Ended(0, ...));
 //   EXPECT_EQ(readFile(image.path), image.stapledWith(ticket));
 //
-// All of it is laid out by the builders, without the code under test.
+// The builders make all of it, without the code under test.
 #pragma once
 
 #include <cstdint>
@@ -22,13 +22,13 @@ using foundation::Data;
 
 struct Artefact {
     std::string name;      // a file name with the kind's extension
-    std::string contents;  // of the file that the ticket goes to
+    std::string contents;  // of the file that gets the ticket
     std::uint8_t algorithm = 0;
     Data hash;
-    /// All of that file with this ticket in place of whatever ticket it had.
+    /// The whole file with this ticket instead of any earlier one.
     std::function<std::string(const Data& ticket)> stapledWith;
-    std::string path = {};  // where it was written last
-    Data executable = {};   // a bundle's; empty for what is one file
+    std::string path = {};  // the last path it was written to
+    Data executable = {};   // a bundle's; empty for a single file
 
     /// The hash as lines of the tool show it.
     std::string prettyHash() const;
@@ -36,7 +36,7 @@ struct Artefact {
     TicketPayloadBuilder payload() const;
 
     bool isBundle() const { return !executable.empty(); }
-    /// Where the ticket goes: the file itself, or the one in the bundle.
+    /// The file that gets the ticket: the artefact itself, or a file in the bundle.
     std::string file() const { return isBundle() ? path + "/Contents/CodeResources" : path; }
     /// For the names of tests: "SignedImage".
     std::string kind() const;
@@ -45,13 +45,13 @@ struct Artefact {
 /// Bytes without any regularity, the same for every run.
 Data irregularData(std::size_t count);
 
-/// An image of `data` that carries an ad-hoc signature of its own: algorithm 2.
+/// An image of `data` with an ad-hoc signature: algorithm 2.
 Artefact signedImage(const Data& data = irregularData(100'000));
 
-/// An image of `data` that carries none: its hash is the one made up for unsigned images, algorithm 2.
+/// An unsigned image of `data`: it has the synthetic hash of unsigned images, algorithm 2.
 Artefact unsignedImage(const Data& data = irregularData(100'000));
 
-/// A package whose archive has `data` at its end and an SHA-1 checksum, which is its hash: algorithm 1.
+/// A package whose archive ends with `data`. Its hash is its SHA-1 checksum: algorithm 1.
 Artefact signedPackage(const Data& data = irregularData(100'000));
 
 /// A bundle with an ad-hoc signature, algorithm 2. In place of a ticket it has `data`.

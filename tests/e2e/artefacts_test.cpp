@@ -44,7 +44,7 @@ class FileArtefact : public EndToEndTest, public testing::WithParamInterface<Art
         return payload;
     }
 
-    /// After each the file is exactly what it would be if it had never carried another.
+    /// After each staple the file is the same as if it had never had another ticket.
     void staplesInTurn(const std::vector<Data>& tickets) {
         for (const Data& ticket : tickets) {
             serveTicket(ticket);
@@ -157,7 +157,7 @@ INSTANTIATE_TEST_SUITE_P(OfEveryKind, FileArtefact,
                          testing::Values(&signedImage, &unsignedImage, &signedPackage),
                          [](const auto& kind) { return kind.param({}).kind(); });
 
-// Packages: what else stands behind the archive.
+// Packages: other bytes after the archive.
 
 class Package : public EndToEndTest {
   protected:
@@ -168,7 +168,7 @@ class Package : public EndToEndTest {
     PackageBuilder package() const { return PackageBuilder().archive(archive.build()); }
     static std::string text(const Data& bytes) { return foundation::toString(bytes); }
 
-    /// What stapling `ticket` makes of the package.
+    /// The package after stapling `ticket`.
     std::string stapled(const PackageBuilder& package) {
         writeFile(path, package.build());
         serveTicket(ticket);

@@ -1,5 +1,5 @@
-// Many artefacts, their tickets, and a record service that knows them: what the companions that handle many
-// are run on.
+// Many artefacts, their tickets, and a record service that knows them, for the companions that handle many
+// artefacts.
 //
 //   const auto images = writeImages(3);
 //   serveRecords();
@@ -32,34 +32,34 @@ class BatchTest : public EndToEndTest {
     Command ticketCommand(std::vector<std::string> arguments) const;
     ProcessResult ticketTool(std::vector<std::string> arguments) const;
 
-    /// Unsigned images, each with a hash of its own, and a genuine ticket for each in `records`.
+    /// Unsigned images with different hashes, and a genuine ticket for each in `records`.
     std::vector<Artefact> writeImages(std::size_t count, const std::string& folder = "builds/many");
-    /// Paths below "builds", one for each way in which a staple can end without a fault of service or volume,
-    /// with its cause.
+    /// Paths below "builds", one for each outcome of a staple without a fault of service or volume, with its
+    /// cause.
     std::map<std::string, std::string> writeEveryOutcome();
     static std::vector<std::string> pathsOf(const std::vector<Artefact>& artefacts);
     static std::string recordNameOf(const Artefact& artefact) { return "2/" + artefact.prettyHash(); }
-    /// A new one, whose signature is its own.
+    /// A new ticket with a new signature.
     Data ticketOf(const Artefact& artefact) const { return sealed(artefact.payload()); }
-    /// The one in `records`.
+    /// The ticket in `records`.
     const Data& issuedFor(const Artefact& artefact) const {
         return records.at(recordNameOf(artefact)).value();
     }
 
-    /// Answers lookups with what is in `records` then, in the order asked for.
+    /// Responds to lookups with the present contents of `records`, in the requested order.
     void serveRecords();
-    /// The names that a lookup asks for.
+    /// The names in a lookup.
     static std::vector<std::string> namesIn(const RecordedRequest& request);
-    /// The body of an answer with these records.
+    /// The body of a response with these records.
     std::string bodyFor(const std::vector<std::string>& names) const;
-    /// How many names each lookup asked for.
+    /// The number of names in each lookup.
     std::vector<std::size_t> groupSizes();
 
-    /// The lines of a run with --json, but for the summary.
+    /// The lines of a run with --json, except the summary.
     static std::vector<Value> reportsOf(const ProcessResult& result);
     static Value summaryOf(const ProcessResult& result);
 
-    /// Each of these lines, after the program's name, ends with 64 and one line that says why.
+    /// Each of these command lines, after the program's name, ends with 64 and a one-line reason.
     void expectWrongUsage(const std::string& program,
                           const std::vector<std::vector<std::string>>& lines) const;
 
@@ -69,16 +69,16 @@ class BatchTest : public EndToEndTest {
     static bool isStapled(const Artefact& artefact, const Data& ticket);
     std::size_t countStapled(const std::vector<Artefact>& artefacts) const;
 
-    /// By name: a ticket, or nothing where the service has none. Changed between runs, read by the service's
-    /// threads during them.
+    /// By name: a ticket, or `nullopt` if the service has none. The test changes it between runs; the
+    /// service's threads read it during them.
     std::map<std::string, std::optional<Data>> records;
 
-    /// Held by what the service does with what the test has.
+    /// Locked while the service uses the test's data.
     mutable std::mutex serving;
 
   private:
-    /// A run orders what the test does before and after it and what the service does meanwhile. Language and
-    /// ThreadSanitizer know nothing of other processes: this says the same to them.
+    /// A run orders the test's actions before and after it and the service's actions during it. The language
+    /// and ThreadSanitizer do not see other processes, so this lock states the same order.
     void orderWithService() const { const std::lock_guard order(serving); }
 };
 

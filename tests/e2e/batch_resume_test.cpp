@@ -1,4 +1,4 @@
-// pinwell-batch when it is cut short, and when it goes on: journals, signals, two runs at once.
+// Interrupted and resumed runs of pinwell-batch: journals, signals, two runs at once.
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -39,7 +39,7 @@ class BatchResume : public BatchTest {
     ProcessResult resume(const std::vector<Artefact>& artefacts, const std::string& operation = "staple") {
         return batch(resuming(artefacts, operation));
     }
-    /// What lookups have asked for since the last call.
+    /// The names in lookups since the last call.
     std::vector<std::string> askedFor() {
         std::vector<std::string> names;
         const auto requests = service().requests();
@@ -47,7 +47,7 @@ class BatchResume : public BatchTest {
             for (std::string& name : namesIn(requests[seen_])) names.push_back(std::move(name));
         return names;
     }
-    /// Answers lookups of that record, and no other ones.
+    /// Responds to lookups of that record only.
     void serveOnly(const std::string& name) {
         service().setHandler([this, name](const RecordedRequest& request) {
             return namesIn(request) == std::vector{name} ? answer(bodyFor({name}))
@@ -55,7 +55,7 @@ class BatchResume : public BatchTest {
                                                          : answer(R"({"records":[]})");
         });
     }
-    /// No file of this run grows beyond 4 KiB. Tickets are smaller.
+    /// No file of this run can exceed 4 KiB. Tickets are smaller.
     Command withShortFiles(const std::vector<std::string>& arguments) const {
         Command limited = batchCommand({"-c", "ulimit -f 4; exec \"$0\" \"$@\"", PINWELL_BATCH_PROGRAM});
         limited.executable = "/bin/bash";
@@ -75,7 +75,7 @@ class BatchResume : public BatchTest {
     std::uint64_t resumedOf(const ProcessResult& result) const {
         return summaryOf(result)["resumed"].unsignedIntegerValue();
     }
-    /// Another byte in a file whose length and time of modification stay as they are.
+    /// Changes a byte in a file, but not its length and time of modification.
     static void changeUnseen(const std::string& path, std::size_t offset) {
         const auto time = std::filesystem::last_write_time(path);
         std::string contents = readFile(path);
@@ -83,8 +83,8 @@ class BatchResume : public BatchTest {
         writeFile(path, contents);
         std::filesystem::last_write_time(path, time);
     }
-    /// Bundles, whose ticket is a file of its own: nothing else of them is written, whenever the process
-    /// dies.
+    /// Bundles, whose ticket is a separate file: no other file of them is written, at whatever time the
+    /// process dies.
     std::vector<Artefact> writeBundles(std::size_t count) {
         std::vector<Artefact> bundles;
         for (std::size_t i = 0; i < count; ++i) {
@@ -107,7 +107,7 @@ class BatchResume : public BatchTest {
     std::size_t seen_ = 0;
 };
 
-// What is done, and what is done again.
+// Completed artefacts, and artefacts that are done again.
 
 TEST_F(BatchResume, WhatIsDoneIsNotDoneAgain) {
     const auto images = writeImages(5);
@@ -160,7 +160,7 @@ TEST_F(BatchResume, WhatWasRebuiltWithTheSameLengthAndTimeIsDoneAgain) {
     EXPECT_THAT(askedFor(), ElementsAre(recordNameOf(other)));
 }
 
-// The hash that a signature states is not one of all that the artefact holds.
+// The hash that a signature states does not cover all of the artefact.
 TEST_F(BatchResume, WhatWasChangedWithTheSameLengthTimeAndStatedHashIsDoneAgain) {
     std::vector<Artefact> artefacts;
     for (const Artefact& one : {signedImage(), signedPackage(), signedBundle()}) {
@@ -202,7 +202,7 @@ TEST_F(BatchResume, WhatFailedIsDoneAgain) {
     EXPECT_EQ(resumedOf(resume(images)), 4U);
 }
 
-// A staple says what was done, not what is so: that is for validate.
+// A staple reports its actions, not the present state: that is for validate.
 TEST_F(BatchResume, AStapleThatIsDoneStaysDoneWhenItsTicketIsRevoked) {
     const auto images = writeImages(1);
     serveRecords();
@@ -225,7 +225,7 @@ TEST_F(BatchResume, AValidationThatHasEndedDoesNotHideARevocation) {
                 testing::UnorderedElementsAre(Reports("revoked", 77), Reports("worked", 0)));
 }
 
-// Else one that always fails would let the others rest on what was so once.
+// Otherwise an artefact that always fails would let the others keep an old result.
 TEST_F(BatchResume, AValidationHasEndedWhateverItSaysOfTheArtefacts) {
     const auto images = writeImages(2);
     serveRecords();
@@ -240,7 +240,7 @@ TEST_F(BatchResume, AValidationGoesOnWhileSomeWereNotLookedAt) {
     serveRecords();
     ASSERT_EQ(batch({"staple", "-q"}, images).exitStatus, 0);
     askedFor();
-    // A part of the list, then one that nobody answers, then one that is given no time.
+    // A part of the list, then one without a response, then one without any time.
     serveOnly(recordNameOf(images[0]));
     const std::vector<std::string> impatient{"validate", "--json", "--retries", "0", "--resume", journal};
     EXPECT_EQ(batch(impatient, images).exitStatus, 68);
@@ -344,7 +344,7 @@ TEST_F(BatchResume, AJournalThatCannotBeWrittenIsSaidOnce) {
     EXPECT_EQ(result.exitStatus, 74) << result.errors;
     EXPECT_THAT(linesOf(result.errors), ElementsAre(HasSubstr(journal)));
     EXPECT_THAT(reportsOf(result), AllOf(SizeIs(60), Each(Reports("worked", 0))));
-    // What fitted counts, and what did not is done again.
+    // The complete lines count, and the others are done again.
     const ProcessResult again = resume(images, "validate");
     EXPECT_EQ(again.exitStatus, 0);
     EXPECT_THAT(resumedOf(again), AllOf(testing::Ge(1U), testing::Lt(60U)));
@@ -403,7 +403,7 @@ TEST_F(BatchResume, AKilledRunGoesOnWhereItWas) {
     std::size_t said = 0;  // in runs that were killed: a line of each is in the journal, or was just to be
     for (const std::size_t last : {0U, 5U, 20U, 40U}) {
         RunningProcess run(batchCommand(resuming(bundles)));
-        // One that is quicker than the test ends by itself.
+        // A run that is quicker than the test ends by itself.
         if (last == 0) {
             ASSERT_TRUE(service().waitForRequests(1));
         } else {
@@ -414,7 +414,7 @@ TEST_F(BatchResume, AKilledRunGoesOnWhereItWas) {
         said +=
             reportsOf({.exitStatus = {}, .signal = 0, .output = wholeLinesOf(result.output), .errors = {}})
                 .size();
-        // What was there before, or the ticket as far as it had been written, or nothing yet.
+        // The earlier file, a part of the ticket, or no file yet.
         for (const Artefact& one : bundles) {
             if (!std::filesystem::exists(one.file())) continue;
             const std::string there = readFile(one.file());
@@ -469,7 +469,7 @@ TEST_P(BatchSignal, FinishesTheWritesUnderWay) {
     ASSERT_TRUE(run.waitForLine("{\"path\"").has_value());
     ::kill(run.id(), signal());
     const ProcessResult result = run.wait();
-    // It may have been done before the signal came; else each artefact is one or the other, and said to be.
+    // It may have ended before the signal; otherwise each artefact has one of the two states, as reported.
     EXPECT_THAT(result.exitStatus, testing::Optional(testing::AnyOf(0, status())));
     const auto reports = reportsOf(result);
     EXPECT_THAT(reports, SizeIs(60));

@@ -31,8 +31,8 @@ Script anyScript(const std::function<void(Script&)>& steps) {
     return script;
 }
 
-// How many artefacts share a lookup depends on how quickly they are read: what counts lookups has one
-// artefact.
+// The number of artefacts in a lookup depends on how quickly they are read. So a test that counts lookups has
+// one artefact.
 
 // Connections that break.
 
@@ -88,7 +88,7 @@ INSTANTIATE_TEST_SUITE_P(
 
 class BatchService : public BatchTest {
   protected:
-    /// Answers so many lookups with this, and all later ones with records.
+    /// The response to the first `count` lookups; later lookups get records.
     void serveFirst(std::size_t count, const Response& first) {
         service().setHandler([this, first, left = count](const RecordedRequest& request) mutable {
             if (left == 0) return answer(bodyFor(namesIn(request)));
@@ -208,11 +208,11 @@ TEST_F(BatchService, AnAssetServerThatIsNotTrustedIsNotTriedAgain) {
     EXPECT_THAT(stranger.connections(), SizeIs(1));
 }
 
-// Groups that are answered otherwise than they were asked for.
+// Responses that differ from the requests.
 
 struct Grouping {
     std::string title;
-    /// What becomes of the names before they are answered.
+    /// Changes the names before the response.
     std::function<std::vector<std::string>(std::vector<std::string>)> change;
 };
 
@@ -237,7 +237,7 @@ TEST_P(BatchWithoutGroups, AsksForEachRecordAlone) {
     for (std::size_t i = 0; i < images.size(); ++i)
         EXPECT_EQ(readFile(images[i].path),
                   i == 5 ? images[i].contents : images[i].stapledWith(issuedFor(images[i])));
-    // One group was tried. How many names there were by then depends on how quickly they were read.
+    // One group was tried. Its size depends on how quickly the artefacts were read.
     const auto sizes = groupSizes();
     EXPECT_LE(std::count_if(sizes.begin(), sizes.end(), [](std::size_t size) { return size > 1; }), 1);
     EXPECT_GE(std::count(sizes.begin(), sizes.end(), 1U), 8);
@@ -306,11 +306,11 @@ TEST_F(BatchService, ATicketOfAnotherRecordIsNotAcceptable) {
     for (const Artefact& image : images) EXPECT_EQ(readFile(image.path), image.contents);
 }
 
-// Large tickets, which have a file of their own.
+// Large tickets, in separate files.
 
 class BatchAssets : public BatchService {
   protected:
-    /// Names an asset in the place of each ticket. `asset` answers what is fetched.
+    /// Names an asset instead of each ticket. `asset` is the response to its download.
     void serveAssets(std::function<Response(const std::string& recordName)> asset) {
         const std::string assets = service().url("/asset/");
         service().setHandler([this, asset = std::move(asset), assets](const RecordedRequest& request) {
@@ -366,7 +366,7 @@ TEST_F(BatchAssets, OfAnotherSizeThanAnnouncedAreNotAcceptable) {
     EXPECT_EQ(countStapled(images), 0U);
 }
 
-// A service that says nothing.
+// A silent service.
 
 TEST_F(BatchService, AnArtefactsTimeIsUpThoughTheServiceSaysNothing) {
     const auto images = writeImages(3);
@@ -385,7 +385,7 @@ TEST_F(BatchService, AGroupThatIsNotAnsweredHoldsUpNoOther) {
     std::vector<std::string> arguments{"staple", "--json", "--retry-delay", "0"};
     for (const Artefact& image : images) arguments.push_back(image.path);
     RunningProcess run(batchCommand(arguments));
-    // Another group is answered, and its artefacts are done, before the first one is.
+    // Another group gets its response before the first, and its artefacts are done.
     ASSERT_TRUE(gate.waitUntilReached());
     EXPECT_TRUE(run.waitForLine("{\"path\"").has_value());
     gate.open();
@@ -426,7 +426,7 @@ TEST_F(BatchService, WaitsUntilTheTicketIsIssued) {
     EXPECT_EQ(result.exitStatus, 0) << result.output;
     EXPECT_THAT(reportsOf(result), AllOf(SizeIs(2), Each(Reports("worked", 0))));
     EXPECT_EQ(countStapled(images), 2U);
-    // What was issued is not asked for again.
+    // An issued ticket is not requested again.
     std::size_t asked = 0;
     for (const RecordedRequest& request : service().requests()) {
         const auto names = namesIn(request);

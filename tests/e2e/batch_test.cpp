@@ -1,4 +1,4 @@
-// pinwell-batch as it is run: what it does with lists, what it says, and what it ends with.
+// Runs of pinwell-batch: lists, output and exit status.
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -37,7 +37,7 @@ class Batch : public BatchTest {
     }
 };
 
-// What it does.
+// The effects of a run.
 
 TEST_F(Batch, StaplesEveryKindOfArtefact) {
     std::vector<Artefact> artefacts;

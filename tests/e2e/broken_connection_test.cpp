@@ -1,5 +1,5 @@
-// Servers that fall silent or break off, at each point of an exchange. How long silence is borne is told at
-// the session, whose clock a test can move: here the silence ends when the test has seen the tool wait.
+// Servers that fall silent or disconnect, at each point of an exchange. The tests of the session cover the
+// time limits, because they can move its clock. Here the silence ends when the test has seen the tool wait.
 #include <csignal>
 
 #include "fixture.h"
@@ -10,7 +10,7 @@ namespace {
 using testing::ElementsAre;
 using testing::IsEmpty;
 
-/// How far an exchange has come.
+/// The progress of an exchange.
 struct Phase {
     std::string title;
     Script script;

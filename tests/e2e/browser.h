@@ -1,4 +1,4 @@
-// Chromium without a window, which reaches loopback and nothing else.
+// Chromium without a window, which reaches only loopback.
 #pragma once
 
 #include <unistd.h>
@@ -15,7 +15,7 @@ inline bool hasBrowser() {
     return ::access(CHROMIUM_PROGRAM, X_OK) == 0;
 }
 
-/// `command` says where and in which environment; its arguments are left out.
+/// `command` gives the executable and the environment, without arguments.
 inline ProcessResult browse(Command command, const std::string& directory,
                             std::vector<std::string> arguments) {
     command.executable = CHROMIUM_PROGRAM;

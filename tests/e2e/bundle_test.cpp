@@ -1,4 +1,4 @@
-// Where a bundle's ticket goes, and what happens when it cannot go there.
+// The place of a bundle's ticket, and failures to write it there.
 #include <sys/stat.h>
 #include <unistd.h>
 

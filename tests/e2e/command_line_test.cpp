@@ -1,4 +1,4 @@
-// Words and options: what the tool takes them for, what it says about wrong ones, and how loud it is.
+// Words and options: their meaning, the tool's output for wrong ones, and its verbosity.
 #include <filesystem>
 
 #include "fixture.h"
@@ -31,7 +31,7 @@ std::string usage(const std::string& program = "pinwell") {
            "bundles, and signed \"flat\" installer packages.\n";
 }
 
-/// Status 64, this on standard error, nothing on standard output.
+/// Status 64, this text on standard error, an empty standard output.
 testing::Matcher<const ProcessResult&> RefusedWithUsage(const std::string& text = usage()) {
     return AllOf(Field(&ProcessResult::exitStatus, Optional(64)), Field(&ProcessResult::output, IsEmpty()),
                  Field(&ProcessResult::errors, text));
@@ -53,7 +53,7 @@ TEST_F(CommandLine, ACommandWordAloneIsAnsweredWithTheUsage) {
 }
 
 TEST_F(CommandLine, ALoneOptionIsNotScanned) {
-    // The scan would answer either with a usage text of its own.
+    // The scan would print its own usage text for either.
     EXPECT_THAT(pinwell({"--help"}), RefusedWithUsage());
     EXPECT_THAT(pinwell({"--nonsense"}), RefusedWithUsage());
 }

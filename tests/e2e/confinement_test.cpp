@@ -1,5 +1,5 @@
-// The real programs, with foreign code in the middle of a parser: what it tries fails, and the run ends as it
-// would have. And what they do on a kernel that cannot confine them, and when a parser runs away.
+// The real programs, with foreign code in the middle of a parser: its attempts fail, and the run ends
+// normally. Also kernels that cannot confine the programs, and parsers that run away.
 #include <fcntl.h>
 #include <sys/syscall.h>
 #include <unistd.h>
@@ -97,7 +97,7 @@ class Intruded : public LocalServiceTest {
 
 using ConfinedParser = Intruded;
 
-// What the attempts are worth.
+// Without confinement, the attempts succeed.
 TEST_F(ConfinedParser, IsWhatKeepsTheIntruderFromIt) {
     issueAndServe();
     Command run = intruded(command({"staple", application()}), "attempts");
@@ -169,7 +169,7 @@ TEST_F(ConfinedParser, OfTicketFilesDoesNoHarm) {
 
 TEST_F(ConfinedParser, OfARequestDoesNoHarm) {
     record("client-certificate", {"ci.example", "--out", directory / "client"});
-    // Nobody listens on port 1: artefacts are read before.
+    // Nobody listens on port 1: the program reads artefacts first.
     const ProcessResult result = runProcess(
         intruded(program(PINWELL_TICKET_PROGRAM,
                          {"request", "--url", "https://127.0.0.1:1", "--cert",
@@ -197,7 +197,7 @@ TEST_F(ConfinedParser, OfTheServiceDoesNoHarmAndOpensNoConnection) {
     expectHarmlessWithoutNetwork(attempts());
 }
 
-// What a renewal does: new files beside the old ones, and links that lead to them.
+// A renewal writes new files beside the old ones, and links to them.
 TEST_F(LocalServiceTest, ReadsACertificateAgainWhoseLinksLeadElsewhereByThen) {
     namespace fs = std::filesystem;
     fs::create_directories(directory / "archive");

@@ -1,13 +1,13 @@
-// A place to run the real tool in: a signed bundle, genuine tickets for it, a platform directory that trusts
-// them, a record service that does what the test says, and an environment in which nothing is the developer's
-// own.
+// The surroundings of a run of the real tool: a signed bundle, genuine tickets for it, a platform
+// directory that trusts them, a scripted record service, and an environment without the developer's own
+// settings.
 //
 //   TEST_F(Lookup, SaysWhyThereIsNoTicket) {
 //       serve(answer(R"({"records":[{"reason":"Record not found"}]})"));
 //       EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(), ...)));
 //   }
 //
-// Everything lives below one temporary directory, and every test has its own.
+// Everything is below one temporary directory, and every test has its own.
 #pragma once
 
 #include <gmock/gmock.h>
@@ -34,7 +34,7 @@ using foundation::Data;
 /// Shown when an expectation about a run fails.
 void PrintTo(const ProcessResult& result, std::ostream* out);
 
-/// A run that ended with this status, said these lines on standard output, and nothing on standard error.
+/// A run with this status, these lines on standard output, and an empty standard error.
 testing::Matcher<const ProcessResult&> Ended(int status,
                                              const testing::Matcher<std::vector<std::string>>& lines);
 
@@ -52,16 +52,16 @@ inline constexpr int kSecureConnectionFailed = 8;
 inline constexpr int kBadServerResponse = 9;
 inline constexpr int kConnectionLost = 10;
 inline constexpr int kProxyFailed = 11;
-/// For failures that different versions of the transfer library tell apart differently.
+/// For failures to which versions of the transfer library give different codes.
 inline constexpr int kAnyCode = 0;
 
-/// An answer of the record service with this body: status 200, request identifier "REQUEST".
+/// A response of the record service with this body: status 200, request identifier "REQUEST".
 Response answer(std::string body);
 
-/// The body of an answer whose record holds this ticket.
+/// The body of a response whose record contains this ticket.
 std::string inlineRecord(const Data& ticket);
 
-/// The body of an answer whose record names where a ticket can be had; `size` is JSON, or left out when
+/// The body of a response whose record names a ticket's URL; `size` is JSON, or omitted if
 /// empty.
 std::string assetRecord(const std::string& urlTemplate, const std::string& size);
 std::string assetRecord(const std::string& urlTemplate, std::size_t size);
@@ -70,7 +70,7 @@ class EndToEndTest : public testing::Test {
   protected:
     EndToEndTest();
 
-    /// Ends the service before what it refers to, in the fixtures on this one.
+    /// Ends the service before the objects it refers to, in the fixtures on this one.
     void TearDown() override { service_.reset(); }
 
     // Running the tool.
@@ -80,10 +80,10 @@ class EndToEndTest : public testing::Test {
     ProcessResult staple() const { return pinwell({"staple", bundle}); }
     ProcessResult validate() const { return pinwell({"validate", bundle}); }
 
-    /// A run whose download fails says so with this line, and then does nothing more, for ever.
+    /// A run with a failed download reports it with this line, and then waits for ever.
     void expectParked(const testing::Matcher<std::string>& line) const;
 
-    // What it always says.
+    // The lines of every run.
 
     std::string processing() const { return "Processing: " + bundle; }
     std::string prettyHash() const { return "2/" + foundation::toHex(hash); }
@@ -97,7 +97,7 @@ class EndToEndTest : public testing::Test {
         return "The validate action failed! Error " + std::to_string(status) + ".";
     }
 
-    /// The end of a staple whose lookup failed on the way, with that code of URLErrorDomain, after these
+    /// The end of a staple whose lookup failed in transit, with that code of URLErrorDomain, after these
     /// lines.
     testing::Matcher<const ProcessResult&> FailedOnTheWay(
         int code, std::vector<testing::Matcher<std::string>> linesBefore = {}) const;
@@ -110,25 +110,25 @@ class EndToEndTest : public testing::Test {
     /// Adds a certificate, by default to the maker's own roots.
     void trust(const IssuedCertificate& certificate, const std::string& store = "roots");
     void writePlatformSettings(std::string_view json);
-    /// Whom to ask for records: HOST or HOST:PORT.
+    /// Sets the record service: HOST or HOST:PORT.
     void contact(const std::string& host);
 
     // The record service.
 
     /// Starts it on first use: a well-behaved one under 127.0.0.1, whose root is trusted.
     HostileServer& service();
-    /// Starts it under another identity, and names it in platform.json as `host`. Trusts nobody.
+    /// Starts it under another identity, and names it in platform.json as `host`. Adds no trust.
     HostileServer& startService(const ServerIdentity& identity, const std::string& host = "127.0.0.1",
                                 HostileServerOptions options = {});
-    /// Every request is answered so.
+    /// The response to every request.
     void serve(Response response);
-    /// Nothing but refusals from now on; the server's threads are done with what the handler before refers
-    /// to.
+    /// Refuses every request after this call; the server's threads no longer use the earlier handler's
+    /// objects.
     void serveNoMore() { serve({.status = 503}); }
     void serveTicket(const Data& ticket) { serve(answer(inlineRecord(ticket))); }
-    /// The lookup is answered with this record; what comes after it, with `asset`.
+    /// The response to the lookup has this record; later requests get `asset`.
     void serveAsset(const std::string& record, const Response& asset);
-    /// A ticket of its own file, as announced, from the record service's own host.
+    /// A ticket in its own file, as announced, from the record service's own host.
     void serveAsset(const Data& ticket);
 
     // Tickets.
@@ -140,11 +140,11 @@ class EndToEndTest : public testing::Test {
     Data revokedTicket() const { return sealed(payload().revoked()); }
     Data ticketForOthers() const { return sealed(TicketPayloadBuilder().entry(2, hashOf(0x77))); }
 
-    // What is on the disk.
+    // The files on the disk.
 
     std::string ticketPath() const { return bundle + "/Contents/CodeResources"; }
     void stapleByHand(const Data& ticket) { writeFile(ticketPath(), ticket); }
-    /// The bytes of the stapled ticket; nothing when there is no regular file.
+    /// The bytes of the stapled ticket; `nullopt` if there is no regular file.
     std::optional<Data> stapled() const;
     /// Everything below a directory, by its path from there, sorted.
     static std::vector<std::string> namesBelow(const std::string& path);

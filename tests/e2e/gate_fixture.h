@@ -1,4 +1,4 @@
-// pinwell-gate as it is run, over samples of a real record service that the real tool has stapled.
+// Runs of pinwell-gate over samples of a real record service, stapled by the real tool.
 #pragma once
 
 #include <csignal>

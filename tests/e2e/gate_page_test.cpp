@@ -1,6 +1,6 @@
-// The report in HTML, in a browser: what a person sees of it, and that it asks nobody and runs nothing.
+// The report in HTML, in a browser: its visible contents, and that it runs nothing and sends no request.
 //
-// Skipped without Chromium. Its pictures go to the test's own directory, and are gone with it.
+// Skipped without Chromium. Its screenshots are in the test's own directory, which is removed.
 #include <netinet/in.h>
 #include <poll.h>
 #include <sys/socket.h>
@@ -27,7 +27,7 @@ using testing::AllOf;
 using testing::HasSubstr;
 using testing::Not;
 
-/// A server on loopback that has nothing, and counts who comes.
+/// A server on loopback without contents, which counts connections.
 class EmptyServer {
   public:
     EmptyServer() : socket_(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0)) {
@@ -93,7 +93,7 @@ class GatePage : public GateRun {
         return browse(command({}), directory.path(), std::move(arguments));
     }
 
-    /// The document as it is once the browser has made all that it will make of it.
+    /// The final document in the browser.
     std::string documentIn(const std::string& page) const {
         const ProcessResult result = chromium({"--dump-dom", "file://" + page});
         EXPECT_EQ(result.exitStatus, 0) << result.errors;
@@ -183,7 +183,7 @@ TEST_F(GatePage, RunsNothingAndAsksNobodyWhateverNamesAre) {
                             Not(HasSubstr("<img")), Not(HasSubstr("<b "))));
     EXPECT_EQ(server.visitors(), 0);
 
-    // Were something to get into the page, its policy would still allow neither.
+    // Even if something got into the page, its policy would allow neither.
     const std::string markup = script + "<img src=\"http://" + server.address() + "/x\">";
     std::string spoilt = readFile(file);
     spoilt.insert(spoilt.find("<h1>"), markup);

@@ -1,5 +1,4 @@
-// The reports of pinwell-gate, as other programs read them: by their schemas, as XML, and where they are
-// kept.
+// The reports of pinwell-gate for other programs: their schemas, their XML, and the place of their files.
 #include <sys/stat.h>
 
 #include <filesystem>
@@ -29,7 +28,7 @@ class GateReport : public GateRun {
         return result.output;
     }
 
-    /// What the validator says of a document; nothing if the document is as the schema has it.
+    /// The validator's complaints about a document; `nullopt` if the document fits the schema.
     std::string faultsOf(const std::string& document, const char* schema) const {
         writeFile(directory / "document.json", std::string_view(document));
         Command check;
@@ -39,8 +38,7 @@ class GateReport : public GateRun {
         return result.exitStatus == 0 ? std::string() : "refused: " + result.output + result.errors;
     }
 
-    /// Altered images whose names are no plain text for somebody: for a terminal, XML, HTML, a URI, a
-    /// message.
+    /// Altered images with names that are special in a terminal, in XML, HTML, a URI or a message.
     std::vector<std::string> oddlyNamed() const {
         std::vector<std::string> paths;
         for (const char* const name :
@@ -55,7 +53,7 @@ class GateReport : public GateRun {
         return paths;
     }
 
-    /// Samples of every verdict that a run offline comes to.
+    /// Samples of every verdict of an offline run.
     std::vector<std::string> mixed() const {
         flip(application() + "/Contents/Resources/ReadMe.txt", 0);
         std::vector<std::string> paths = samples;
@@ -130,9 +128,9 @@ TEST_F(GateReport, ConformsToItsSchemaInJson) {
     }
 }
 
-// tests/e2e/sarif.schema.json is our own wording of the standard: of the objects that pinwell-gate writes,
-// the required members, types, enumerations and limits. It does not cover objects that are not written, nor
-// what the standard says in prose beside the form of messages. No other validator for SARIF is packaged.
+// tests/e2e/sarif.schema.json is our own wording of the standard. For the objects that pinwell-gate writes,
+// it covers the required members, types, enumerations and limits. It does not cover other objects, nor the
+// standard's rules in prose about the form of messages. There is no packaged validator for SARIF.
 TEST_F(GateReport, ConformsToTheStandardInSarif) {
     for (const auto& paths : {mixed(), oddlyNamed()}) {
         const std::string report = reportIn("sarif", paths);
@@ -215,7 +213,7 @@ TEST_F(GateReport, GoesToAFile) {
     const std::string file = directory / "report.txt";
     EXPECT_THAT(gate({"--offline", "-o", file, image()}), Ended(0, IsEmpty()));
     EXPECT_EQ(readFile(file), gate({"--offline", image()}).output);
-    // A shorter one in its place.
+    // A shorter report replaces it.
     EXPECT_THAT(gate({"--offline", "-o", file, application(), image(), package()}), Ended(0, IsEmpty()));
     EXPECT_THAT(gate({"--offline", "-o", file, image()}), Ended(0, IsEmpty()));
     EXPECT_EQ(readFile(file), gate({"--offline", image()}).output);
@@ -275,7 +273,7 @@ TEST_F(GateReport, ThatCannotBeWrittenEndsWith74) {
     EXPECT_EQ(gate({"--offline", "--attest", "/dev/full", image()}).exitStatus, 74);
 }
 
-// As for the other companions: whoever stops reading is told nothing, and the verdict stands.
+// As with the other companions: a reader that closes the pipe gets no message, and the verdict stays.
 TEST_F(GateReport, MayLoseItsReader) {
     flip(image(), 0);
     for (const Output output : {Output::brokenPipe, Output::closed}) {

@@ -1,5 +1,4 @@
-// pinwell-gate as it is run: samples of a real record service, stapled by the real tool, each spoilt in one
-// way.
+// Runs of pinwell-gate: samples of a real record service, stapled by the real tool, each spoilt in one way.
 #include <filesystem>
 #include <functional>
 #include <ostream>
@@ -40,7 +39,7 @@ TEST_F(Gate, AdmitsWhatWasSignedAndStapled) {
 
 // Tampering, one fault a row.
 
-/// Where a text stands in a file.
+/// The offset of a text in a file.
 std::size_t placeOf(const std::string& contents, std::string_view text) {
     const std::size_t at = contents.find(text);
     if (at == std::string::npos) throw std::runtime_error("the sample does not hold what is to be spoilt");
@@ -67,7 +66,7 @@ Spoil trailerByte(std::size_t at) {
     return [=](const std::string& path) { flip(path, readFile(path).size() - kImageTrailer + at); };
 }
 
-/// In the heap of the archive, which begins behind header and table of contents.
+/// In the heap of the archive, which begins after header and table of contents.
 Spoil heapByte(std::size_t at) {
     return [=](const std::string& path) {
         const std::string contents = readFile(path);
@@ -181,7 +180,7 @@ const std::vector<Tampering> kImageRows{
     {"UnsignedOneByteLess", "Unsigned.dmg", shortened(), "trailer"},
 };
 
-// The heap holds the checksum of 20 bytes, the signature, and the files, where the table says.
+// The heap contains the checksum of 20 bytes, the signature, and the files, at the places in the table.
 const std::vector<Tampering> kPackageRows{
     {"Magic", "Sample.pkg", byteAt(0), "archive"},
     {"HeaderSize", "Sample.pkg", byteAt(5), "archive"},

@@ -1,5 +1,5 @@
-// Which names a server's certificate may have for the host that is asked for. A tunnel leads every host to
-// the test's server, so that any name can be asked for.
+// The names that a server's certificate may have for the requested host. A tunnel leads every host to the
+// test's server, so that a test can request any name.
 #include <filesystem>
 
 #include "fixture.h"
@@ -32,7 +32,7 @@ class HostNameTest : public EndToEndTest {
         chain.leaf.subjectAlternativeNames = names;
         return chain;
     }
-    /// The record service is that host, and this server is what a proxy connects to in its place.
+    /// The record service is that host; a proxy connects to this server instead.
     HostileServer& serviceUnder(const std::string& host, const ServerIdentity& identity) {
         HostileServer& server = startService(identity);
         contact(host);
@@ -49,7 +49,7 @@ class HostNameTest : public EndToEndTest {
         return AllOf(StartsWith("Certificate trust evaluation did not return expected result. (5) "),
                      HasSubstr(host));
     }
-    /// Both policies miss the name, and nothing else.
+    /// Both policies reject only the name.
     Matcher<const ProcessResult&> RefusedFor(const std::string& host,
                                              const std::string& title = "Record Service") const {
         const Matcher<std::string> fault =
@@ -113,7 +113,7 @@ INSTANTIATE_TEST_SUITE_P(Server, BadName,
                                          NameRow{"AsAURL", "URI:https://api.lumora.example/"}),
                          titleOfName);
 
-// A dot at the end, which makes a name absolute and names the same host.
+// A dot at the end makes a name absolute; it still names the same host.
 
 TEST_F(HostNameTest, ADotAtTheEndIsNoHostInThePlatformFile) {
     contact("api.lumora.example.");
@@ -145,7 +145,7 @@ TEST_F(HostNameTest, ADotAtTheEndOfBothNamesIsRefusedAllTheSame) {
     EXPECT_THAT(staple(), RefusedFor("www.lumora.example."));
 }
 
-// Whose certificate it is.
+// The owner of the certificate.
 
 TEST_F(HostNameTest, ATrustedCertificateBehindTheServersOwnHelpsNobody) {
     const IssuedChain genuine = chainFor("DNS:api.lumora.example").issue();
@@ -153,7 +153,7 @@ TEST_F(HostNameTest, ATrustedCertificateBehindTheServersOwnHelpsNobody) {
     rogue.leaf.subject = commonName("Rogue");
     rogue.leaf.key = SigningKey::cached(KeyKind::p256, "rogue");
     const IssuedCertificate alone = issueCertificate(rogue.leaf, nullptr);
-    // One that names the genuine server as its issuer, without having its key.
+    // It names the genuine server as its issuer, without the server's key.
     rogue.leaf.signer = rogue.leaf.key;
     const IssuedCertificate below = issueCertificate(rogue.leaf, &genuine.leaf);
     for (const IssuedCertificate* own : {&alone, &below}) {

@@ -1,5 +1,4 @@
-// Answers that are made to mislead: compressed, announced, addressed or written otherwise than an honest
-// server's.
+// Misleading responses: their compression, announcement, address or form differs from an honest server's.
 #include <filesystem>
 
 #include "fixture.h"
@@ -39,7 +38,7 @@ class HostileAnswer : public EndToEndTest {
     testing::Matcher<const ProcessResult&> FoundNoTicketBecause(const std::string& line) const {
         return Ended(65, ElementsAre(processing(), line, noTicketLine(), stapleFailed(65)));
     }
-    /// What is said of a body that is not JSON: it has no record, and so no reason either.
+    /// The message for a body that is not JSON: it has no record, and so no reason either.
     testing::Matcher<const ProcessResult&> FoundNoJSON() const {
         return FoundNoTicketBecause("Lumora query for Sample.app (" + prettyHash() +
                                     ") failed due to \"(null)\".");
@@ -53,7 +52,7 @@ class HostileAnswer : public EndToEndTest {
     const std::string record = inlineRecord(genuine);
 };
 
-// Informational answers.
+// Informational responses.
 
 TEST_F(HostileAnswer, HundredsOfInformationalAnswersComeBeforeTheAnswer) {
     for (const std::string line : {"100 Continue", "102 Processing", "199 Other"}) {
@@ -88,9 +87,9 @@ TEST_F(HostileAnswer, AProtocolThatNobodyAskedToSwitchToIsNoAnswer) {
     expectUntouched();
 }
 
-// Compression, which nobody asked for.
+// Compression without a request for it.
 
-/// 80 MiB of blanks, more than any answer may have, in some 80 kB.
+/// 80 MiB of blanks, more than the limit of a response, in some 80 kB.
 std::string zlibBomb() {
     return foundation::toString(deflated(std::string(std::size_t{80} << 20U, ' ')));
 }
@@ -138,7 +137,7 @@ TEST_F(HostileAnswer, AnAssetThatIsCompressedIsNotUnpacked) {
     EXPECT_EQ(stapled(), std::nullopt);
 }
 
-// Redirects. PORT stands for one where another server waits, and must wait in vain.
+// Redirects. PORT is the port of another server, which must get no request.
 
 class RedirectTarget : public HostileAnswer, public testing::WithParamInterface<Row> {};
 
@@ -207,7 +206,7 @@ TEST_F(HostileAnswer, ARedirectedAssetIsFetchedByHTTPSOnly) {
     expectUntouched();
 }
 
-// Where an asset is said to be.
+// The stated URL of an asset.
 
 class AssetOfAnotherKind : public HostileAnswer, public testing::WithParamInterface<Row> {};
 
@@ -247,7 +246,7 @@ TEST_F(HostileAnswer, AnAssetURLWithoutAHostIsNone) {
     expectUntouched();
 }
 
-// How large it is said to be.
+// The stated size of an asset.
 
 TEST_F(HostileAnswer, ASizeOfAnotherKindIsNone) {
     const std::string got = std::to_string(genuine.size());

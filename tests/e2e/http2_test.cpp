@@ -28,7 +28,7 @@ std::string bigEndian(std::size_t value, unsigned width) {
     return bytes;
 }
 
-/// With a length of its own, whatever is behind it.
+/// With any length, whatever follows.
 std::string frameHead(std::size_t length, unsigned type, unsigned flags, unsigned stream) {
     return bigEndian(length, 3) + bigEndian(type, 1) + bigEndian(flags, 1) + bigEndian(stream, 4);
 }
@@ -41,7 +41,7 @@ std::string settings(const std::string& payload = {}) {
 
 const std::string kStatus200 = "\x88";  // of the static table
 
-/// A number behind a prefix of 7 bits that is not used otherwise.
+/// A number after an otherwise unused prefix of 7 bits.
 std::string prefixed(std::size_t value) {
     if (value < 127) return std::string(1, static_cast<char>(value));
     std::string bytes = "\x7f";
@@ -49,12 +49,12 @@ std::string prefixed(std::size_t value) {
     return bytes + static_cast<char>(value);
 }
 
-/// A field that goes into the dynamic table.
+/// A field for the dynamic table.
 std::string field(const std::string& name, const std::string& value) {
     return "\x40" + prefixed(name.size()) + name + prefixed(value.size()) + value;
 }
 
-/// An answer whose head is this, and whose body comes next.
+/// A response with this head; its body follows.
 std::string head(const std::string& block) {
     return frame(kHeaders, kEndHeaders, kOurStream, block);
 }
@@ -68,8 +68,8 @@ class HTTP2 : public EndToEndTest {
         trust(serverChain.root);
         return startService(identityOf(serverChain), "127.0.0.1", {.applicationProtocol = "h2"});
     }
-    /// The connection preface looks like a head of HTTP/1, and the request's body is what the request ends
-    /// with: nothing can be said about a stream before its request has come.
+    /// The connection preface looks like a head of HTTP/1, and the request ends with its body. A server must
+    /// not send frames on a stream before its request.
     static Script afterTheRequest() { return Script().readHead().readUntil("}]}"); }
     void expectUntouched() const {
         EXPECT_EQ(stapled(), std::nullopt);
@@ -148,7 +148,7 @@ TEST_F(HTTP2, ABlockThatGrowsWhenUnpackedIsRefused) {
 }
 
 TEST_F(HTTP2, PaddingBeyondItsFrameIsNoAnswer) {
-    // The transfer library gives up the connection and hands out what has come before.
+    // The transfer library gives up the connection and passes on the earlier bytes.
     for (const std::string& before : {std::string(), frame(kDataFrame, 0, kOurStream, "{\"records\":")}) {
         http2Service().enqueue(
             afterTheRequest().send(settings() + head(kStatus200) + before +
@@ -158,8 +158,8 @@ TEST_F(HTTP2, PaddingBeyondItsFrameIsNoAnswer) {
     }
 }
 
-// Only the server itself can end a stream so. Some releases of the transfer library take it for the end of
-// the body; without a length, what has come is judged as it is.
+// Only the server itself can end a stream this way. Some releases of the transfer library treat it as the end
+// of the body. Without a length, the received bytes are judged.
 TEST_F(HTTP2, AResetWithoutAnErrorWithinTheBodyGivesNoTicket) {
     http2Service().enqueue(afterTheRequest()
                                .send(settings() + head(kStatus200) +
@@ -202,7 +202,7 @@ TEST_F(HTTP2, IsNotSpokenWithoutAnAgreement) {
 }
 
 TEST_F(HTTP2, AVersionThatWasNotAgreedOnIsNoWayToPassOffACutBody) {
-    // In HTTP/2 the length of a body is certain; in what only says that it is HTTP/2, it is not.
+    // In HTTP/2 the length of a body is certain; in a response that only claims HTTP/2, it is not.
     for (const std::string version : {"HTTP/2", "HTTP/2.0", "HTTP/3", "HTTP/0.9", "HTTP/1.2"}) {
         service().enqueue(
             Script().readRequest().send(version + " 200 OK\r\n\r\n" + inlineRecord(ticket())).cut());

@@ -1,5 +1,5 @@
-// pinwell-inspect as it is run: what it says of artefacts that the tool has stapled, its exit status, its
-// JSON, and that it neither changes anything nor asks anybody.
+// Runs of pinwell-inspect: its output for stapled artefacts, its exit status, its JSON, and that it changes
+// nothing and sends no request.
 #include <sys/stat.h>
 
 #include <filesystem>

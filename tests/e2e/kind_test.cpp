@@ -1,4 +1,4 @@
-// Which paths the tool takes up, and what it says about the others.
+// The paths that the tool accepts, and its messages about others.
 #include <sys/stat.h>
 
 #include <filesystem>
@@ -14,7 +14,7 @@ using testing::ElementsAre;
 using testing::Not;
 using testing::StartsWith;
 
-/// The ordinary run has a service that would answer; none of these paths gets that far.
+/// The ordinary run has a service that would respond; no run with these paths gets that far.
 class Kind : public EndToEndTest {
   protected:
     std::string path(const std::string& name) const { return directory / ("builds/" + name); }
@@ -28,7 +28,7 @@ class Kind : public EndToEndTest {
         }
     }
 
-    /// Taken up as a bundle: what it has to say is that it carries no ticket.
+    /// Accepted as a bundle: the message is that it has no ticket.
     void expectBundle(const std::string& name) const {
         EXPECT_THAT(pinwell({"validate", path(name)}),
                     Ended(65, ElementsAre("Processing: " + path(name),
@@ -96,7 +96,7 @@ TEST_F(Kind, APlainFolderIsRefused) {
 TEST_F(Kind, ATextFileIsRefused) {
     writeFile(path("notes.txt"), std::string_view("text"));
     const ProcessResult result = pinwell({"validate", path("notes.txt")});
-    // "plain text document" where there is a shared MIME database, "document" where there is none.
+    // "plain text document" with a shared MIME database, "document" without one.
     EXPECT_THAT(result, Ended(66, ElementsAre("Processing: " + path("notes.txt"),
                                               AllOf(StartsWith("Pinwell is incapable of working with "),
                                                     testing::EndsWith("document files.")))));

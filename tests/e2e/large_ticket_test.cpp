@@ -1,4 +1,4 @@
-// Tickets that are delivered as a file of their own.
+// Tickets that are delivered by download.
 #include <csignal>
 #include <filesystem>
 
@@ -166,7 +166,7 @@ TEST_F(LargeTicket, ThatIsRevokedIsSaidSo) {
                       "The ticket for Sample.app has been revoked. Tollmark will prevent it from running.")));
 }
 
-// Where it comes from.
+// The source of the download.
 
 TEST_F(LargeTicket, MayComeFromAnotherHostWithACertificateOfItsOwn) {
     HostileServer assets(identityOf(ServerChain("localhost").issue()));
@@ -187,7 +187,7 @@ TEST_F(LargeTicket, MayBeRedirected) {
     EXPECT_THAT(staple(), Worked());
 }
 
-// Failures, after which the run waits for good.
+// Failures, after which the run waits for ever.
 
 TEST_F(LargeTicket, AHostThatIsNotTrustedParksTheRun) {
     HostileServer stranger(identityOf(ServerChain("localhost").issue()));

@@ -9,7 +9,7 @@
 namespace pinwell::test {
 
 LocalServiceTest::LocalServiceTest() {
-    // Keys take long to make. The tests of a process copy those of the first one.
+    // Making keys takes long. The tests of a process copy the keys of the first one.
     static const TemporaryDirectory pattern;
     static const std::vector<std::string> names = [this] {
         const ProcessResult sample = lumora({"sample", pattern / "samples"});

@@ -1,4 +1,4 @@
-// A record service of our own, its samples, and a tool that trusts it.
+// A record service of the test, its samples, and a tool that trusts it.
 #pragma once
 
 #include <memory>

@@ -1,4 +1,4 @@
-// The lookup of a ticket's record: what goes over the wire, and what becomes of each answer.
+// The lookup of a ticket's record: the request, and the outcome of each response.
 #include <sys/stat.h>
 
 #include <filesystem>
@@ -21,7 +21,7 @@ constexpr const char* kUniqueName = "[0-9A-F]{8}(-[0-9A-F]{4}){3}-[0-9A-F]{12}\\
 
 class Lookup : public EndToEndTest {
   protected:
-    /// Staples with this body as the service's answer.
+    /// Staples with this body as the service's response.
     ProcessResult stapleWith(const std::string& body) {
         serve(answer(body));
         return staple();

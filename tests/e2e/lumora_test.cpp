@@ -1,4 +1,4 @@
-// The tool against the real record service: what a user does from the first sample to a revocation.
+// The tool against the real record service: a user's steps from the first sample to a revocation.
 #include <csignal>
 #include <filesystem>
 
@@ -31,7 +31,7 @@ class LocalService : public LocalServiceTest {
                     processing(), "Could not validate ticket for " + bundle,
                     "The ticket for Sample.app has been revoked. Tollmark will prevent it from running."));
     }
-    /// For a bundle whose hash this test need not know.
+    /// For a bundle with a hash unknown to this test.
     testing::Matcher<const ProcessResult&> NotFound(const std::string& path) const {
         return Ended(65, ElementsAre("Processing: " + path,
                                      AllOf(StartsWith("Lumora query for "),

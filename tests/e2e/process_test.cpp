@@ -1,4 +1,4 @@
-// The runner that all tests here stand on.
+// The process runner of all tests here.
 #include <csignal>
 
 #include "fixture.h"
@@ -34,7 +34,7 @@ TEST(Process, HasTheGivenEnvironmentAndDirectoryOnly) {
 }
 
 TEST(Process, StartsWithDefaultSignals) {
-    // A pipe that nobody reads ends a child that does nothing about it.
+    // A pipe without a reader ends a child that does not handle the signal.
     Command command = shell("echo lost; echo more");
     command.output = Output::brokenPipe;
     const auto disposition = std::signal(SIGPIPE, SIG_IGN);

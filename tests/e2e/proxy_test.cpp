@@ -1,4 +1,4 @@
-// Proxies that the environment names: one from the distribution, and some that no distribution would have.
+// Proxies named by the environment: one from the distribution, and some hostile ones.
 #include <arpa/inet.h>
 #include <sys/socket.h>
 
@@ -17,7 +17,7 @@ using testing::IsEmpty;
 using testing::Matcher;
 using testing::Not;
 
-/// A port of the loopback address that nobody listened at a moment ago.
+/// A port of the loopback address that was free a moment ago.
 std::uint16_t freePort() {
     const foundation::FileDescriptor socket(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
     sockaddr_in address{};
@@ -35,7 +35,8 @@ std::uint16_t freePort() {
 class RealProxy {
   public:
     RealProxy(const TemporaryDirectory& directory, const std::string& moreSettings = {}) {
-        // Its port cannot be left to the system, and may be taken between our look and its own.
+        // The system cannot choose its port, and another process may take the port between our check and its
+        // start.
         for (int attempt = 0; attempt < 10; ++attempt) {
             port_ = freePort();
             writeFile(directory / "proxy.conf", "Port " + std::to_string(port_) +
@@ -149,8 +150,8 @@ TEST_F(ProxyTest, ThatAsksForAPasswordIsGivenTheOneOfItsURLAndNoOther) {
 
 struct ProxyChoice {
     std::string title;
-    Environment variables;  // PROXY stands for one that works, DEAD for one that does not
-    bool isUsed;            // the one that works
+    Environment variables;  // PROXY is a working one, DEAD is not
+    bool isUsed;            // whether the working one is used
 };
 
 class ProxyVariables : public ProxyTest, public testing::WithParamInterface<ProxyChoice> {};
@@ -239,7 +240,7 @@ TEST_F(LyingProxy, AnswersWithAPage) {
 }
 
 TEST_F(LyingProxy, AnswersInThePlaceOfTheServer) {
-    // The ticket is genuine, but no TLS server said it.
+    // The ticket is genuine, but it did not come from a TLS server.
     EXPECT_THAT(stapleAfterAnswer(answer(inlineRecord(ticket())).bytes()), FailedOnTheWay(kAnyCode));
     EXPECT_THAT(stapleAfterAnswer("HTTP/1.1 200 OK\r\n\r\n" + answer(inlineRecord(ticket())).bytes()),
                 FailedOnTheWay(kSecureConnectionFailed));

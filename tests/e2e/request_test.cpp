@@ -1,4 +1,4 @@
-// pinwell-ticket request as it is run, against a server that asks for the client's certificate.
+// Runs of pinwell-ticket request, against a server that requires the client's certificate.
 #include <sys/stat.h>
 
 #include <algorithm>
@@ -38,7 +38,7 @@ class TicketRequest : public BatchTest {
         return fields.issue();
     }
 
-    /// Starts the service, which is trusted and lets in who has a certificate of the clients' authority.
+    /// Starts the service. It is trusted, and accepts every certificate of the clients' authority.
     HostileServer& administration(TLSVersion version = TLSVersion::tls13) {
         trust(serverChain.root);
         return startService(identityOf(serverChain), "127.0.0.1",
@@ -111,7 +111,7 @@ TEST_F(TicketRequest, KeepsTheTicketsThatTheServiceIssues) {
     EXPECT_THAT(first.body, AllOf(HasSubstr(recordNameOf(artefacts[0])),
                                   HasSubstr("\"label\":\"" + artefacts[0].name + "\"")));
 
-    // They can be attached like those that were fetched.
+    // They can be attached like fetched tickets.
     std::vector<std::string> attach{"attach", "--tickets", tickets};
     for (const Artefact& one : artefacts) attach.push_back(one.path);
     EXPECT_EQ(ticketTool(attach).exitStatus, 0);
@@ -224,7 +224,7 @@ TEST_F(TicketRequest, SaysThatTheServiceDoesNotKnowTheClient) {
     const IssuedChain stranger = chainFor("stranger.example");
     writeFile(certificate, stranger.serverPem());
     writeFile(key, stranger.leaf.key.pem());
-    // There the objection always comes before the request goes.
+    // In this version the refusal always comes before the request is sent.
     administration(TLSVersion::tls12);
     const ProcessResult result = request({"--json"}, images);
     EXPECT_EQ(result.exitStatus, 68);

@@ -1,5 +1,4 @@
-// The samples: what they are to the tool, and what they are to other readers of their formats, before and
-// after a ticket is stapled to them.
+// The samples, for the tool and for other readers of their formats, before and after a staple.
 #include <filesystem>
 
 #include "local_service.h"
@@ -19,8 +18,8 @@ constexpr const char* kDataBehindTheArchive = "There are data after the end of a
 
 class Sample : public LocalServiceTest {
   protected:
-    /// What another program, found in the search path, says of something; it must be content, and have
-    /// nothing to warn of but a ticket behind an archive, which is data behind its end indeed.
+    /// The output of another program, found in the search path. It must succeed, and may warn only of a
+    /// ticket after an archive, which really is data after the archive's end.
     ProcessResult tool(const std::string& name, std::vector<std::string> arguments) const {
         arguments.insert(arguments.begin(), name);
         const ProcessResult result = runProcess({.executable = "/usr/bin/env",
@@ -106,7 +105,7 @@ TEST_F(Sample, IsStapledAgainWithATicketThatIsDeliveredAsAnAsset) {
 TEST_F(Sample, OfAnImageIsReadByOthersBeforeAndAfter) {
     for (const std::string& path : {signedImage(), unsignedImage()}) {
         const std::string before = readFile(path);
-        const std::size_t dataEnd = before.find("</plist>");  // what a code signature would follow
+        const std::size_t dataEnd = before.find("</plist>");  // a code signature would follow here
         ASSERT_NE(dataEnd, std::string::npos);
         EXPECT_THAT(tool("7z", {"l", path}).output, HasSubstr("README.TXT"));
         EXPECT_THAT(tool("7z", {"t", path}).output,
@@ -139,7 +138,8 @@ TEST_F(Sample, OfAPackageIsReadByOthersBeforeAndAfter) {
 }
 
 TEST_F(Sample, OfAPackageCarriesASignatureThatVerifies) {
-    // The checksum opens the heap, the signature stands behind it, both where the table of contents says.
+    // The checksum is first in the heap and the signature follows it, both at the places in the table of
+    // contents.
     const std::string contents = readFile(package());
     const auto at = [&](std::size_t offset) {
         return std::to_integer<unsigned>(std::byte(contents[offset]));

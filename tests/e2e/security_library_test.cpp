@@ -1,5 +1,4 @@
-// A platform security library beside the tool: its ticket-signing policy is the one that tickets are judged
-// by.
+// A platform security library beside the tool: its ticket-signing policy judges the tickets.
 #include "fixture.h"
 
 namespace pinwell::test {
@@ -21,7 +20,7 @@ class SecurityLibrary : public EndToEndTest {
         return Ended(65,
                      ElementsAre(processing(), "Could not validate ticket for " + bundle, stapleFailed(65)));
     }
-    /// The tool's own policy asks for basic constraints; the library's does not.
+    /// The tool's own policy requires basic constraints; the library's does not.
     Data ticketOfNoAuthority() {
         TicketChain chain;
         chain.intermediate.basicConstraints = BasicConstraints{false};

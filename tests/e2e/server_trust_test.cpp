@@ -1,4 +1,4 @@
-// Which servers are talked to, and what is said about the others.
+// Accepted servers, and the messages about refused ones.
 #include <filesystem>
 
 #include "fixture.h"
@@ -34,7 +34,7 @@ Matcher<std::string> evaluationFor(const std::string& title) {
 
 class ServerTrust : public EndToEndTest {
   protected:
-    /// A server with this chain, and a genuine ticket for whoever talks to it.
+    /// A server with this chain, and a genuine ticket for every client.
     ProcessResult stapleFrom(const ChainFields& fields) { return stapleFrom(fields.issue()); }
     ProcessResult stapleFrom(const IssuedChain& issued) { return stapleFrom(identityOf(issued)); }
     ProcessResult stapleFrom(const ServerIdentity& identity) {
@@ -106,7 +106,7 @@ TEST_F(ServerTrust, AChainWithoutItsIntermediateIsRefused) {
 }
 
 TEST_F(ServerTrust, TheTicketsRootIsTrustedForServersToo) {
-    // Both kinds of root stand in the same place: what tells the chains apart is their policies.
+    // Both kinds of root have the same place: the policies distinguish the chains.
     const IssuedCertificate leaf = issueCertificate(chain.leaf, &ticketChain.intermediate);
     EXPECT_THAT(stapleFrom(ServerIdentity{leaf.pem() + ticketChain.intermediate.pem(), leaf.key.pem()}),
                 Worked());
@@ -193,7 +193,7 @@ TEST_F(ServerTrust, ATitleCannotDriveTheTerminal) {
     EXPECT_THAT(result.outputLines(), Contains(HasSubstr("[2JGood")));
 }
 
-// What the user has chosen.
+// The user's choices.
 
 TEST_F(ServerTrust, ARootThatTheUserAllowsServesServers) {
     trust(serverChain.root, "user-trust/allow");

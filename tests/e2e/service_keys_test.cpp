@@ -1,4 +1,4 @@
-// Keys of the record service that are replaced, encrypted, or in a token: what becomes of tickets and
+// Replaced and encrypted keys of the record service, and keys in a token: their effect on tickets and
 // clients.
 #include <csignal>
 #include <filesystem>
@@ -24,7 +24,7 @@ class ServiceKeys : public LocalServiceTest {
         return Ended(0, ElementsAre(processing(), kValidated));
     }
 
-    /// One line, nothing on standard output.
+    /// One line, and an empty standard output.
     void expectRefusal(const ProcessResult& result, const std::string& part) const {
         EXPECT_EQ(result.exitStatus, 78) << result.errors;
         EXPECT_EQ(result.output, "");
@@ -41,7 +41,7 @@ TEST_F(ServiceKeys, TicketsOfAReplacedSignerStayGenuine) {
     EXPECT_THAT(validate(), Validated());
     EXPECT_THAT(staple(), Stapled(bundle));
 
-    // Clients know nothing of it, and the running service neither.
+    // Clients and the running service notice nothing.
     const std::string image = samples.at(1);
     record("issue", {image});
     EXPECT_THAT(pinwell({"staple", image}), Stapled(image));
@@ -129,7 +129,7 @@ TEST_F(TokenKeys, SignTickets) {
     const ProcessResult rotated = rotateTo(uri());
     ASSERT_EQ(rotated.exitStatus, 0) << rotated.errors;
     EXPECT_EQ(lumora({"check", serviceDirectory}).exitStatus, 0);
-    std::filesystem::remove(inService("ticket-signer.key"));  // nothing needs it any more
+    std::filesystem::remove(inService("ticket-signer.key"));  // no longer needed
     record("issue", samples);
     serveRecords();
     for (const std::string& path : samples) EXPECT_THAT(pinwell({"staple", path}), Stapled(path));

@@ -1,4 +1,4 @@
-// What a verbose run shows of a code signature, and which signatures give a file its hash.
+// The verbose output about a code signature, and the signatures that give a file its hash.
 #include <filesystem>
 
 #include "fixture.h"
@@ -30,7 +30,7 @@ class Signature : public EndToEndTest {
                 SuperBlobBuilder().blob(0, codeDirectory).blob(2, emptyRequirements()).cms(cms).build())
             .build();
     }
-    /// The bundle gets this executable and this hash.
+    /// Gives the bundle this executable and this hash.
     void replaceBundle(const Data& executable, const Data& codeDirectory) {
         BundleBuilder().executable(executable).write(bundle);
         hash = codeHashOf(2, codeDirectory);

@@ -1,4 +1,4 @@
-// Runs whose standard streams are not what they should be: a message is never worth a staple.
+// Runs with unusual standard streams: a lost message never prevents a staple.
 #include <filesystem>
 
 #include "fixture.h"
@@ -13,7 +13,7 @@ class Streams : public EndToEndTest {
   protected:
     Streams() { serveTicket(genuine); }
 
-    /// Whatever could not be said, nothing of it may end up in a file or on the wire.
+    /// Lost messages may never get into a file or onto the wire.
     void expectGoodStaple(const Command& run) {
         const ProcessResult result = runProcess(run);
         EXPECT_EQ(result.exitStatus, 0);
@@ -26,7 +26,7 @@ class Streams : public EndToEndTest {
         EXPECT_EQ(service().requests()[0].body,
                   R"({"records":[{"recordName":")" + ("2/" + prettyHash()) + R"("}]})");
     }
-    /// As talkative as it gets.
+    /// With the most verbose output.
     Command verboseStaple() const { return command({"staple", "-v", bundle}); }
 
     const Data genuine = ticket();
@@ -65,7 +65,7 @@ TEST_F(Streams, AllStreamsAreClosed) {
 }
 
 TEST_F(Streams, NothingElseTakesThePlaceOfAClosedStream) {
-    // Or a message would go to whatever did: a connection, or a file.
+    // Otherwise a message would go to whatever file or connection got the descriptor.
     const Gate gate;
     service().enqueue(Script().readRequest().waitFor(gate).send(answer(inlineRecord(genuine)).bytes()));
     Command closed = verboseStaple();

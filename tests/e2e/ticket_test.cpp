@@ -1,4 +1,4 @@
-// pinwell-ticket as it is run: tickets to files, from files to artefacts, and back.
+// Runs of pinwell-ticket: tickets into files, from files to artefacts, and back.
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -40,7 +40,7 @@ class TicketTool : public BatchTest {
         }
         return artefacts;
     }
-    /// The command with the paths behind it.
+    /// The command followed by the paths.
     ProcessResult tool(std::vector<std::string> arguments, const std::vector<Artefact>& artefacts) const {
         for (const Artefact& one : artefacts) arguments.push_back(one.path);
         return ticketTool(std::move(arguments));
@@ -508,7 +508,7 @@ TEST_F(TicketTool, NeedsNoNetworkInterface) {
     EXPECT_EQ(countStapled(artefacts), 4U);
     EXPECT_EQ(isolated({"extract", "-o", directory / "builds/out", paths[0]}).exitStatus, 0);
     EXPECT_EQ(with({"remove"}).exitStatus, 0);
-    // Only this one asks somebody.
+    // Only this command sends a request.
     EXPECT_EQ(isolated({"fetch", "--retries", "0", "--out", tickets, paths[0]}).exitStatus, 68);
 }
 

@@ -1,5 +1,5 @@
-// What can go wrong between the tool and the record service: connections that break off, answers without
-// measure, redirects.
+// Failures between the tool and the record service: broken connections, responses of excessive length,
+// redirects.
 #include "fixture.h"
 #include "foundation/format.h"
 
@@ -85,7 +85,7 @@ TEST_F(Transport, CutInTheBody) {
 }
 
 TEST_F(Transport, ABodyOfUnknownLengthThatIsCutIsNoAnswer) {
-    // Without a length, the orderly end of the connection is what tells a whole body from a part of one.
+    // Without a length, only the orderly end of the connection distinguishes a whole body from a part.
     EXPECT_THAT(stapleFrom(Script().readRequest().send("HTTP/1.1 200 OK\r\n\r\n" + body).cut()),
                 FailedOnTheWay(kConnectionLost));
     EXPECT_THAT(stapleFrom(Script().readRequest().send("HTTP/1.1 200 OK\r\n\r\n" + body).close()), Worked());
@@ -177,7 +177,7 @@ TEST_F(Transport, ProxiesForOtherProtocolsAreNotUsed) {
     EXPECT_THAT(staple(), Worked());
 }
 
-// Answers.
+// Responses.
 
 TEST_F(Transport, AQuestionForAPasswordIsAnAnswerLikeAnyOther) {
     Response question = answer(body);

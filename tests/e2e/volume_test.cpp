@@ -1,6 +1,6 @@
-// Stapling on real volumes. Where the file system clones, a clone gets the ticket and then the artefact's
-// place; elsewhere the artefact itself is written to. What the artefact is besides its contents is the same
-// afterwards, and nothing else is left.
+// Stapling on real volumes. If the file system clones, a clone gets the ticket and then replaces the
+// artefact; otherwise the artefact itself is written. All its other properties stay the same, and no other
+// file remains.
 #include "support/volume.h"
 
 #include <fcntl.h>
@@ -38,7 +38,7 @@ constexpr std::size_t kVolumeDataSize =
     64 * kBlock + 1000;  // more than a file system keeps among its own records
 constexpr const char* kAccessControlList = "system.posix_acl_access";
 
-/// Where on its volume a byte of a file lies.
+/// The place of a file's byte on its volume.
 struct Place {
     std::uint64_t physical = 0;
     bool shared = false;  // with another file
@@ -102,7 +102,7 @@ class Volumes : public EndToEndTest, public testing::WithParamInterface<std::tup
     }
     ProcessResult validateArtefact() const { return pinwell({"validate", artefact.path}); }
 
-    /// What is on the volume now, less what the file system itself keeps there.
+    /// The present files on the volume, except the file system's own.
     std::vector<std::string> names() const {
         std::vector<std::string> found = namesIn(volume.path());
         std::erase(found, "lost+found");
@@ -298,7 +298,7 @@ INSTANTIATE_TEST_SUITE_P(OfEveryKind, FullPlainVolume,
 
 using FullVolumeWithABundle = FullVolume;
 
-// The old one goes before the new one comes, and makes less room than that needs.
+// The old ticket is removed before the new one is written, and frees less space than the new one needs.
 TEST_P(FullVolumeWithABundle, HasNoTicketRatherThanHalfOfOne) {
     EXPECT_THAT(stapleArtefact(), FailedToWrite());
     EXPECT_FALSE(exists(artefact.file()));

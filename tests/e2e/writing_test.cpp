@@ -1,4 +1,4 @@
-// What happens to an artefact that others work on at the same time.
+// Artefacts that other processes change at the same time.
 #include <fcntl.h>
 #include <sys/file.h>
 
@@ -20,7 +20,7 @@ class SharedArtefact : public EndToEndTest, public testing::WithParamInterface<A
   protected:
     SharedArtefact() { serveTicket(ticket); }
 
-    /// Something else happens to the file while the record service is asked.
+    /// Changes the file during the lookup.
     void whileTheServiceIsAsked(std::function<void()> change) {
         service().setHandler([this, change = std::move(change)](const RecordedRequest&) {
             change();
@@ -79,7 +79,7 @@ TEST_P(SharedArtefact, ThatAnotherHasLockedIsStapledWhenItIsFree) {
     foundation::FileDescriptor locked(open(artefact.path.c_str(), O_RDONLY | O_CLOEXEC));
     ASSERT_EQ(flock(locked.get(), LOCK_EX), 0);
     RunningProcess staple(command({"staple", artefact.path}));
-    // Whoever looks only is not kept waiting.
+    // A reader does not wait.
     EXPECT_EQ(pinwell({"validate", artefact.path}).exitStatus, 65);
     EXPECT_EQ(staple.resultSoFar().output, "");
     locked.reset();
