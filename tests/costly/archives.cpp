@@ -1,4 +1,4 @@
-// Package archives: the table of contents, compressed, and what is behind it.
+// Package archives: the table of contents, compressed, and the bytes after it.
 #include <zlib.h>
 
 #include <stdexcept>
@@ -25,7 +25,7 @@ bool read(const Data& archive) {
     return package.cdHash().has_value();
 }
 
-/// The zlib stream with this document, stored and not compressed: as long as what it holds.
+/// The zlib stream with this document, stored without compression: as long as its contents.
 Data stored(const std::string& document) {
     constexpr std::size_t kLongestBlock = 65535;
     foundation::ByteWriter stream;
@@ -78,7 +78,7 @@ CostlyInput row(std::string name, std::string cost, bool isTaken,
             .control = control};
 }
 
-/// A document as it is, not compressed.
+/// An uncompressed document.
 CostlyInput document(std::string name, std::string cost, std::function<std::string(std::size_t)> make) {
     return {
         .name = "Archive" + name,
@@ -89,7 +89,7 @@ CostlyInput document(std::string name, std::string cost, std::function<std::stri
         .control = control};
 }
 
-/// The stream of a table whose children are `unit`, over and over, as long as `wants(compressed, contents)`.
+/// The stream of a table with repeated children `unit`, until `wants(compressed, contents)` is false.
 Data compressed(const std::string& unit, const std::function<bool(std::size_t, std::size_t)>& wants) {
     const std::string before = tableOf("");
     z_stream state{};
@@ -118,7 +118,7 @@ Data compressed(const std::string& unit, const std::function<bool(std::size_t, s
 
 constexpr std::size_t kMebibyte = std::size_t{1} << 20U;
 
-/// As long as the input wants it, whatever it inflates to.
+/// As long as requested, whatever its inflated length.
 Data bomb(const std::string& unit, std::size_t length) {
     return compressed(unit, [=](std::size_t size, std::size_t) { return size < length; });
 }
@@ -149,7 +149,7 @@ class Blocks {
         for (unsigned i = 0; i < count; ++i) bit((value >> i) & 1U);
         return *this;
     }
-    /// A Huffman code, which comes highest bit first.
+    /// A Huffman code, highest bit first.
     Blocks& code(unsigned value, unsigned count) {
         for (unsigned i = count; i-- > 0;) bit((value >> i) & 1U);
         return *this;
@@ -173,20 +173,19 @@ class Blocks {
     std::size_t used_ = 0;
 };
 
-/// Blocks of fixed codes with nothing in them: ten bits each.
+/// Empty blocks of fixed codes: ten bits each.
 Data emptyBlocks(std::size_t length) {
     Blocks blocks;
     while (blocks.size() < length) blocks.bits(0b010, 3).code(0, 7);
     return std::move(blocks).stream();
 }
 
-/// Blocks that each bring code tables of their own, as large as they get, and use them for nothing but the
-/// end.
+/// Blocks with their own code tables of the largest size, which use them only for the end of the block.
 Data tables(std::size_t length) {
     Blocks blocks;
     // The lengths of the codes' lengths, in the order of the format: 16 17 18 0 8 7 9 6 10 5 11 4 12 3 13 2
-    // 14 1 15. Two codes of one bit: 16 ("as before, 3 to 6 times") and 9; 286 literals of 9 bits would be
-    // too few for a complete code, so 226 of them have 8 bits, with a code of its own: 8 and 9 have two bits.
+    // 14 1 15. Two codes of one bit: 16 ("as before, 3 to 6 times") and 9. But 286 literals of 9 bits are too
+    // few for a complete code, so 226 of them have 8 bits, with their own code: 8 and 9 have two bits.
     while (blocks.size() < length) {
         blocks.bits(0b100, 3).bits(286 - 257, 5).bits(30 - 1, 5).bits(19 - 4, 4);
         for (const unsigned bits :

@@ -37,7 +37,7 @@ bool readPackage(const Data& package) {
     return file.ticketData().has_value();
 }
 
-/// An image with this superblob: entries of slot and offset, then what is behind them.
+/// An image with this superblob: entries of slot and offset, then the bytes after them.
 Data imageWith(const std::vector<std::pair<std::uint32_t, std::uint32_t>>& index, const Data& behind) {
     ByteWriter superblob;
     superblob.be32(0xFADE0CC0)

@@ -1,4 +1,4 @@
-// Certificates: those of a ticket and of a server, each up to 131072 bytes, and the PEM files of distrust.
+// Certificates of a ticket and of a server, each up to 131072 bytes, and the PEM files of distrust.
 #include <algorithm>
 
 #include "costly_input.h"
@@ -18,13 +18,13 @@ using trust::X509Certificate;
 constexpr const char* kServerHost = "api.lumora.example";
 constexpr foundation::Date kJudgedAt{1795204500};  // 2026-11-20 19:55:00 UTC
 
-// As many as a server may send.
+// The maximum that a server may send.
 constexpr std::size_t kListed = 16;
 
-// A certificate may have 131072 bytes. The rest of one, what is around its large part, takes less than this.
+// A certificate may have 131072 bytes. Its other parts, around its large part, take less than the difference.
 constexpr std::size_t kLargePart = 125000;
 
-/// The list in front is judged as a server's, without anchors.
+/// Judges the list as a server's, without anchors.
 void judge(const std::vector<ByteView>& list) {
     const auto service = trust::makeTrustService(
         foundation::PlatformDirectory("/nowhere"), [](std::string_view) {}, [] { return kJudgedAt; });
@@ -103,7 +103,7 @@ Data certificateOf(const Fields& change) {
     return issueCertificate(fields, nullptr).der;
 }
 
-/// Copies of one certificate, whose fields are changed.
+/// Copies of one certificate, with changed fields.
 CostlyInput certificateRow(std::string name, std::string cost, bool isTaken, Fields change) {
     return {.name = "Certificate" + name,
             .cost = std::move(cost),
@@ -118,7 +118,7 @@ Fields edited(std::function<void(CertificateElements&)> edit) {
     return [edit = std::move(edit)](CertificateFields& fields) { fields.edit = edit; };
 }
 
-/// An extension of that value in the place of the one that the fields would write.
+/// An extension of that value instead of the one from the fields.
 Fields extended(const char* oid, const Data& value) {
     return [oid, value](CertificateFields& fields) {
         fields.subjectAlternativeNames.clear();
@@ -142,7 +142,7 @@ Data oddNumber(std::size_t size) {
     return data;
 }
 
-/// Certificates of one name on the slowest curve of the builder, each of which has issued the one before.
+/// Certificates of one name on the builder's slowest curve, each issued by the next one.
 Data namesakes(std::size_t length) {
     const auto key = [](std::size_t i) {
         return SigningKey::cached(KeyKind::p521, "namesake " + std::to_string(i));
@@ -160,7 +160,7 @@ Data namesakes(std::size_t length) {
     return copies(list, length);
 }
 
-/// A thousand names below a thousand constraints: as many comparisons as there may be.
+/// A thousand names below a thousand constraints: the highest permitted number of comparisons.
 Data crossedNames(std::size_t length) {
     constexpr std::size_t kNames = 1000;
     const std::string host =
@@ -171,7 +171,7 @@ Data crossedNames(std::size_t length) {
     chain.leaf.extensions.push_back(
         {"2.5.29.17", false, derElement(0x30, manyOf(name, kNames * name.size()))});
     std::string other = host;
-    other.back() = 'f';  // differs at the end alone
+    other.back() = 'f';  // differs only at the end
     const Data subtree = derElement(0x30, textElement(0x82, other));
     chain.root.extensions.push_back(
         {"2.5.29.30", false, derElement(0x30, derElement(0xA1, manyOf(subtree, kNames * subtree.size())))});

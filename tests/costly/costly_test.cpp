@@ -11,7 +11,7 @@ constexpr std::size_t kMebibyte = std::size_t{1024} * 1024;
 constexpr std::size_t kLength = kMebibyte / 4;
 constexpr int kRuns = 3;
 
-// Against a run that would not come to an end; nothing is measured by it.
+// Stops an endless run; it measures nothing.
 constexpr unsigned kLimit = 60;
 
 // Together 256 MiB for an input of 16 MiB.
@@ -30,7 +30,7 @@ TEST_P(Costly, InputIsReadInProportion) {
 
     MeasuredRead expected = measureRead(row.read, control, kRuns, kLimit);
     MeasuredRead got = measureRead(row.read, costly, kRuns, kLimit);
-    // Other work on the machine disturbs caches and so the ratio. What is out of proportion is so each time.
+    // Other work on the machine disturbs caches, and so the ratio. A real fault shows every time.
     for (int again = 0; again < kMeasuredAgain && got.seconds > row.times * expected.seconds; ++again) {
         expected = measureRead(row.read, control, kRuns, kLimit);
         got = measureRead(row.read, costly, kRuns, kLimit);
@@ -54,7 +54,7 @@ Data fiveBytes() {
     return foundation::toData("12345");
 }
 
-// What the table stands on: what costs more is found.
+// The precondition of the table: a higher cost is found.
 TEST(MeasuredRead, SeesTimeMemoryAndTheResult) {
     const auto busy = [](const Data&) {
         volatile unsigned long sum = 0;

@@ -1,4 +1,4 @@
-// JSON: answers of the service, platform.json, user defaults.
+// JSON: responses of the service, platform.json, user defaults.
 #include "foundation/json.h"
 #include "costly_input.h"
 #include "foundation/bytes.h"
@@ -17,7 +17,7 @@ std::string number(std::size_t i) {
     return std::to_string(i);
 }
 
-/// A list of records, as a service would answer.
+/// A list of records, like a response of the service.
 Data control(std::size_t length) {
     return toData("[" +
                   filled(

@@ -19,7 +19,7 @@ namespace {
 
 constexpr double kKibibytesInAMebibyte = 1024;
 
-/// What the child sends.
+/// The child's report.
 struct Report {
     bool isTaken = false;
     double seconds = 0;
@@ -44,9 +44,9 @@ double statusValue(const std::string& name) {
     throw std::runtime_error("/proc/self/status has no " + name);
 }
 
-/// From now on the peak is what comes.
+/// Resets the peak.
 void forgetPeak() {
-    malloc_trim(0);  // what the parent has freed would be used again without a trace
+    malloc_trim(0);  // otherwise, the parent's freed memory would be used again unnoticed
     std::ofstream file("/proc/self/clear_refs");
     file << 5;
     if (!file.flush()) throw std::runtime_error("the peak of the memory cannot be reset");

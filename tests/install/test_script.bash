@@ -1,10 +1,10 @@
-# What the tests of the scripts share. Sourced.
+# Shared code of the tests of the scripts. Sourced.
 
 # shellcheck source=../support/spoiling.bash
 . "$(dirname "${BASH_SOURCE[0]}")/../support/spoiling.bash"
 said=
 
-# copy_test_script SCRIPTS: scripts/test in the copy, between stand-ins for all that it runs.
+# copy_test_script SCRIPTS: scripts/test in the copy, with stand-ins for all its programs.
 copy_test_script() {
   mkdir "$copy/scripts"
   cp -r "$1/lib" "$1/test" "$copy/scripts/"
@@ -17,6 +17,6 @@ copy_test_script() {
   : > "$last"
 }
 
-# says TEXT: it must be in what was said.
+# says TEXT: the output must contain it.
 says() { grep -qF -- "$1" <<< "$said" || fail "\"$1\" is not said in: $said"; }
 is() { [ "$2" = "$3" ] || fail "$1 is \"$2\", not \"$3\": ${said:-}"; }

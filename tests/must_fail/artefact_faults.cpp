@@ -41,7 +41,7 @@ SuperBlobBuilder stapled(const I& i) {
 DiskImageBuilder imageOf(const SuperBlobBuilder& superblob) {
     return DiskImageBuilder().data(irregularData(kOwnData)).superblob(superblob);
 }
-/// Where the ticket's blob begins in stapled().
+/// The offset of the ticket's blob in stapled().
 std::uint32_t ticketOffset(const I& i) {
     return static_cast<std::uint32_t>(stapled(i).build().size() - blobOf(i).size());
 }
@@ -143,7 +143,7 @@ TrailerFields ticketRecord() {
     fields.type = 2;
     return fields;
 }
-/// Terminator, ticket, and a record that says that length.
+/// Terminator, ticket, and a record with that length.
 std::string withRecordLength(const std::string& ticket, std::uint32_t length) {
     TrailerFields fields = ticketRecord();
     fields.length = length;
@@ -202,9 +202,10 @@ std::vector<PackageFault> packageFaults() {
     };
 }
 
-// Archives that are another's and claim the good one's checksum, or leave in doubt what their signature signs.
+// Archives with other contents that claim the valid archive's checksum, or leave unclear what their signature
+// signs.
 
-/// The checksum that the ticket is for, in an archive with other contents; and where it is in the heap.
+/// The checksum that the ticket lists, in an archive with other contents; and its place in the heap.
 constexpr const char* kPlace = "<offset>0</offset><size>20</size>";
 ArchiveBuilder otherArchive() {
     return ArchiveBuilder().element("<extra/>").afterChecksum(irregularData(kOwnData));
@@ -212,7 +213,7 @@ ArchiveBuilder otherArchive() {
 ArchiveBuilder forged() {
     return otherArchive().checksum(archive().rightChecksum());
 }
-/// The other archive's own checksum first, which is right, and behind it the one that the ticket is for.
+/// First the other archive's own, correct checksum; after it the checksum that the ticket lists.
 ArchiveBuilder withBoth(const std::string& element) {
     return otherArchive().afterChecksum(archive().rightChecksum()).checksumElement(element).signature("CMS");
 }

@@ -1,4 +1,4 @@
-// Artefacts with one thing wrong in each, around a ticket that is as it should be; and answers of the
+// Artefacts with one fault each, around a valid ticket; and responses of the
 // service.
 #pragma once
 
@@ -14,8 +14,8 @@ namespace pinwell::test {
 struct ArtefactFault {
     std::string name;
     std::string wrong;
-    std::string subject;  // whose hash the ticket lists that the service answers with
-    int exit;             // 0 where it is none, and `wrong` says why
+    std::string subject;  // the ticket in the service's response lists its hash
+    int exit;             // 0 if it is no fault, and `wrong` gives the reason
     std::function<void(const std::string& path, const IssuedChain&)> write;
 
     friend void PrintTo(const ArtefactFault& fault, std::ostream* out) { *out << fault.wrong; }
@@ -32,7 +32,7 @@ struct AnswerFault {
     friend void PrintTo(const AnswerFault& fault, std::ostream* out) { *out << fault.wrong; }
 };
 
-/// To a package whose stapled ticket is good, and whose good ticket in base64 is this.
+/// For a package with a valid stapled ticket, which is this in base64.
 std::vector<AnswerFault> answerFaults(const std::string& goodTicket);
 
 }  // namespace pinwell::test

@@ -19,7 +19,7 @@ const std::vector<CertificateFault>& certificateFaults() {
         {"ExpiredLongAgo", "expired in 1999; the ticket policy has no option on dates", "444 555 555", [](C& c, Chain&) { c.notBefore = {800000000}; c.notAfter = {946684799}; }},
         {"NotValidYet", "valid from the next second; the ticket policy has no option on dates", "444 555 555", [](C& c, Chain&) { c.notBefore = {kNow.seconds + 1}; }},
         {"ValidityInverted", "ends before it begins; the ticket policy has no option on dates", "444 555 555", [](C& c, Chain&) { c.notBefore = {kNow.seconds + kDay}; c.notAfter = {kNow.seconds - kDay}; }},
-        // Signatures. A root is an anchor byte for byte: nothing is asked of its own signature.
+        // Signatures. A root is an anchor byte for byte: its own signature is not checked.
         {"SignatureCorrupt", "the last bit of the signature is flipped; a root's own is not looked at", "664 664 664", [](C& c, Chain&) { c.corruptSignature = true; }},
         {"SignedByAnotherKey", "signed by a key that is not the issuer's; a root's own signature is not looked at", "664 664 664", [](C& c, Chain&) { c.signer = SigningKey::cached(KeyKind::p256, "another"); }},
         {"SignedByItself", "signed by its own key, under its issuer's name; a root is", "664 664 664", [](C& c, Chain&) { c.signer = c.key; }},
@@ -89,8 +89,8 @@ const std::vector<CertificateFault>& certificateFaults() {
         {"KeyUsageOfTheClientsPartOfAKeyAgreement", "the key usage is key agreement, for encipherment only", "4-- 5-- 5--", [](C& c, Chain&) { c.keyUsage = "critical,keyAgreement,encipherOnly"; }},
         {"KeyUsageOfAnAuthority", "a leaf's key usage is that of an authority, which allows no TLS", "4-- 5-- 5--", [](C& c, Chain&) { c.keyUsage = "critical,keyCertSign,cRLSign"; }},
         {"KeyUsageOfDataNotCritical", "a leaf's key usage is data encipherment, in an extension that is not critical", "4-- 5-- 5--", [](C& c, Chain&) { c.keyUsage = "dataEncipherment"; }},
-        // Name constraints: of a server's issuers, critical or not. The ticket policy does not apply them, so that they
-        // may not be critical there. A leaf constrains nobody.
+        // Name constraints of a server's issuers, critical or not. The ticket policy does not apply them, so
+        // a ticket's issuers must not have critical ones. A leaf constrains nobody.
         {"HostExcluded", "excludes the host's domain, and is not critical", "444 455 455", [](C& c, Chain&) { c.nameConstraints = "excluded;DNS:lumora.example"; }},
         {"HostExcludedCritical", "excludes the host's domain; the ticket policy does not know critical constraints", "666 455 455", [](C& c, Chain&) { c.nameConstraints = "critical,excluded;DNS:lumora.example"; }},
         {"HostItselfExcluded", "excludes the host itself", "444 455 455", [](C& c, Chain&) { c.nameConstraints = "excluded;DNS:api.lumora.example"; }},
@@ -120,12 +120,12 @@ const std::vector<CertificateFault>& certificateFaults() {
         {"KeyRsaOfAnEvenModulus", "an RSA key whose modulus is even", "566 566 566", [](C& c, Chain&) { c.edit = [](E& e) { e.key = rsaKey(number(256, 0xFE), bytes({1, 0, 1})); }; }},
         {"KeyDsa", "a DSA key", "566 566 566", [](C& c, Chain&) { c.edit = [](E& e) { e.key = underAlgorithm(e.key, bytes({0x30, 9, 6, 7, 0x2A, 0x86, 0x48, 0xCE, 0x38, 4, 1})); }; }},
         {"KeyCompressed", "nothing: the point is in the compressed form", "444 444 444", [](C& c, Chain&) { c.edit = [](E& e) { e.key = compressedPoint(e.key); }; }},
-        // Signatures whose algorithm says too much.
+        // Signatures with superfluous parameters in their algorithm.
         {"EcdsaWithParameters", "ECDSA with parameters, of which it has none; a root's own signature is not looked at", "664 664 664", [](C& c, Chain&) { c.edit = [](E& e) { e.innerAlgorithm = e.outerAlgorithm = bytes({0x30, 12, 6, 8, 0x2A, 0x86, 0x48, 0xCE, 0x3D, 4, 3, 2, 5, 0}); }; }},
         {"AlgorithmUnknown", "an algorithm that nobody knows; a root's own signature is not looked at", "664 664 664", [](C& c, Chain&) { c.edit = [](E& e) { e.innerAlgorithm = e.outerAlgorithm = bytes({0x30, 4, 6, 2, 0x2A, 3}); }; }},
         {"SignatureEmpty", "a signature of no byte; a root's own signature is not looked at", "664 664 664", [](C& c, Chain&) { c.edit = [](E& e) { e.signature = bytes({3, 1, 0}); }; }},
         {"SignatureOfTwoZeros", "a signature of 0 and 0; a root's own signature is not looked at", "664 664 664", [](C& c, Chain&) { c.edit = [](E& e) { e.signature = bytes({3, 9, 0, 0x30, 6, 2, 1, 0, 2, 1, 0}); }; }},
-        // What is no certificate, under a signature that is good.
+        // Malformed certificates under a valid signature.
         {"Version1WithAUniqueIdentifier", "of version 1, and yet with a unique identifier", "xxx xxx xxx", [](C& c, Chain&) { c.version = 1; withoutExtensions(c); c.edit = [](E& e) { e.issuerUniqueIdentifier = bytes({0x81, 2, 0, 7}); }; }},
         {"Version1WithNoExtensions", "of version 1, and yet with an empty list of extensions", "xxx xxx xxx", [](C& c, Chain&) { c.version = 1; withoutExtensions(c); c.edit = [](E& e) { e.extensions = bytes({0xA3, 2, 0x30, 0}); }; }},
         {"Version1WrittenOut", "of version 1, which is written out", "xxx xxx xxx", [](C& c, Chain&) { c.version = 1; withoutExtensions(c); c.edit = [](E& e) { e.version = bytes({0xA0, 3, 2, 1, 0}); }; }},

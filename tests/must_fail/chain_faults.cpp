@@ -91,7 +91,7 @@ Data twin(const Scene& scene, Position position) {
     return underOtherSignature(at(scene.chain, position).der, at(scene.chain, issuer).key);
 }
 
-/// The chain's certificate as its issuer would renew it: another serial number, other dates, the same key.
+/// The chain's certificate after a renewal by its issuer: another serial number, other dates, the same key.
 Data renewed(const Scene& scene, const ChainFields& fields, Position position) {
     CertificateFields later = position == kLeaf           ? fields.leaf
                               : position == kIntermediate ? fields.intermediate
@@ -110,7 +110,7 @@ Data leafWithKey(const Scene& scene, const ChainFields& fields, Data (*form)(fou
     return issueCertificate(leaf, &scene.chain.intermediate).der;
 }
 
-/// Levels of certificates between leaf and intermediate, each of which could have issued each of the level
+/// Levels of certificates between leaf and intermediate, where each could have issued each of the level
 /// below.
 void branchOut(Scene& scene, const ChainFields& fields, int levels, int width) {
     std::vector<Data> list;
@@ -131,8 +131,8 @@ void branchOut(Scene& scene, const ChainFields& fields, int levels, int width) {
     scene.list = std::move(list);
 }
 
-/// Certificates of one name and without key identifiers, each of which has issued the one before: every pair
-/// has to be checked.
+/// Certificates of one name and without key identifiers, each issued by the next one: every pair must be
+/// checked.
 void namesakes(Scene& scene, const ChainFields& fields) {
     const auto key = [](std::size_t i) {
         return SigningKey::cached(KeyKind::p256, "namesake " + std::to_string(i));
@@ -150,7 +150,7 @@ void namesakes(Scene& scene, const ChainFields& fields) {
     }
 }
 
-/// So many names of the leaf below so many constraints of the root, all of which permit the host.
+/// That many names of the leaf below that many constraints of the root, which all permit the host.
 void crossNames(ChainFields& chain, int nameCount, int constraintCount) {
     const Data host = derElement(0x82, foundation::asBytes(kHost));
     Data all;
@@ -188,7 +188,7 @@ const std::vector<ChainFault>& chainFaults() {
         {"ImpostorIntermediate", "an impostor's intermediate in the place of the genuine one", "5 5 5", nullptr, [](Scene& s, const Chain& f) { s.list[1] = impostorOf(f).intermediate.der; }},
         {"ImpostorRoot", "an impostor's root in the list; the genuine one is an anchor", "4 4 4", nullptr, [](Scene& s, const Chain& f) { s.list[2] = impostorOf(f).root.der; }},
         {"ImpostorWithoutKeyIdentifiers", "no key identifiers, and the issuers' names with other keys", "6 6 6", [](Chain& c) { for (C* one : {&c.root, &c.intermediate, &c.leaf}) one->subjectKeyIdentifier = one->authorityKeyIdentifier = KeyIdentifier::omitted(); }, [](Scene& s, const Chain& f) { s.list[0] = impostorOf(f).leaf.der; }},
-        // What the list holds.
+        // The contents of the list.
         {"SelfSignedLeaf", "the leaf has signed itself", "5 5 5", nullptr, [](Scene& s, const Chain& f) { s.list = {issueCertificate(f.leaf, nullptr).der}; }},
         {"SelfSignedLeafBeforeTheIssuers", "the leaf has signed itself, genuine issuers stand behind it", "5 5 5", nullptr, [](Scene& s, const Chain& f) { s.list[0] = issueCertificate(f.leaf, nullptr).der; }},
         {"IntermediateMissing", "the intermediate is left out", "5 5 5", nullptr, [](Scene& s, const Chain&) { s.list.erase(s.list.begin() + 1); }},
@@ -223,7 +223,7 @@ const std::vector<ChainFault>& chainFaults() {
         {"RootDeniedAndLeftOut", "the user distrusts the root, which is left out of the list", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.denied = {s.chain.root.der}; s.list.pop_back(); }},
         {"AllowedAndDenied", "the user trusts and distrusts the leaf", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.allowed = s.denied = {s.chain.leaf.der}; }},
         {"DeniedAndCorrupt", "the user distrusts the root, and a signature is corrupt besides", "3 3 3", [](Chain& c) { c.leaf.corruptSignature = true; }, [](Scene& s, const Chain&) { s.denied = {s.chain.root.der}; }},
-        // User trust goes by what a certificate says, and not by the bytes of its signature.
+        // User trust depends on a certificate's contents, not on the bytes of its signature.
         {"LeafDeniedAndReencoded", "the user distrusts the leaf, which comes as (r, n - s)", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.denied = {s.chain.leaf.der}; s.list[kLeaf] = twin(s, kLeaf); }},
         {"IntermediateDeniedAndReencoded", "the user distrusts the intermediate, which comes as (r, n - s)", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.denied = {s.chain.intermediate.der}; s.list[kIntermediate] = twin(s, kIntermediate); }},
         {"RootDeniedAndReencoded", "the user distrusts the root, which comes as (r, n - s)", "3 3 3", nullptr, [](Scene& s, const Chain&) { s.denied = {s.chain.root.der}; s.list[kRoot] = twin(s, kRoot); }},

@@ -1,15 +1,15 @@
-// Certificate chains with one thing wrong in each, and what the three policies say to them.
+// Certificate chains with one fault each, and the verdicts of the three policies.
 //
 // Two tables. A certificate fault is put into the leaf, the intermediate and the root in turn, a chain fault
-// into the whole. Both state verdicts, a character a case:
+// into the whole. Both state verdicts, one character for each case:
 //
 //   1 3 4 5 6   the verdict's number: by the user alone, denied, trusted, recoverable, fatal
-//   x           not a certificate that can be read: no verdict is reached
+//   x           not a readable certificate: no verdict is reached
 //   p           the list itself is refused as a bad parameter
-//   -           the fault makes no sense there
+//   -           the fault does not apply there
 //
-// of certificate faults "ticket pinned compatibility", each leaf, intermediate, root: "444 555 555"; of chain
-// faults one for each policy: "5 5 4". Where a fault is none for a policy, the text says why.
+// A certificate fault has "ticket pinned compatibility", each leaf, intermediate, root: "444 555 555". A chain
+// fault has one for each policy: "5 5 4". If a policy accepts a fault, the text gives the reason.
 #pragma once
 
 #include <functional>

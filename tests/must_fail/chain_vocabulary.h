@@ -11,13 +11,13 @@
 
 namespace pinwell::test {
 
-/// Put into the leaf, the intermediate and the root in turn; chain_faults.h says what the verdicts are.
+/// Put into the leaf, the intermediate and the root in turn; chain_faults.h explains the verdicts.
 struct CertificateFault {
     const char* name;
     const char* wrong;
     const char* verdicts;
     std::function<void(CertificateFields&, ChainFields&)> fields;
-    std::function<void(foundation::Data&)> der = nullptr;  // what becomes of the certificate in the list
+    std::function<void(foundation::Data&)> der = nullptr;  // changes the certificate in the list
 };
 
 const std::vector<CertificateFault>& certificateFaults();
@@ -55,7 +55,7 @@ void withoutExtensions(CertificateFields& c);
 void useKey(CertificateFields& c, KeyKind kind);
 void everyKeyRsa(ChainFields& chain);
 
-/// Changes the byte behind the first or last place of `pattern`; an error if there is none.
+/// Changes the byte after the first or last place of `pattern`; an error if there is none.
 void flipBehind(Data& der, const Data& pattern, std::size_t offset, bool last, std::byte mask);
 
 extern const Data kEcdsaWithSha2;

@@ -1,4 +1,4 @@
-// Chains that must not be trusted, before the policies that the tool itself makes.
+// Chains that must not be trusted, under the policies that the tool makes.
 #include <gtest/gtest.h>
 
 #include "chain_faults.h"
@@ -41,7 +41,7 @@ trust::PolicyRef makePolicy(const ChainCase& one, trust::TrustService& service) 
     return policy;
 }
 
-/// Nothing when one of them cannot be read.
+/// Returns `nullopt` if one of them cannot be read.
 std::optional<std::vector<trust::CertificateRef>> parse(const std::vector<foundation::Data>& list,
                                                         trust::TrustService& service) {
     std::vector<trust::CertificateRef> certificates;
@@ -69,7 +69,7 @@ char judge(const ChainCase& one, std::string& reason) {
     return static_cast<char>('0' + static_cast<int>(verdict));
 }
 
-/// By the user alone is enough for a server, and for a ticket it is not.
+/// Trust by the user alone is enough for a server, but not for a ticket.
 bool isGood(ChainPolicy policy, char verdict) {
     return verdict == '4' || (verdict == '1' && policy != ChainPolicy::ticket);
 }
@@ -97,7 +97,7 @@ std::vector<ChainCase> casesWith(ChainPolicy policy) {
     return cases;
 }
 
-/// What becomes of a ticket whose chain has the verdict: only 4 counts.
+/// The outcome of a ticket whose chain has the verdict: only 4 counts.
 class SignerTable : public testing::TestWithParam<ChainCase> {};
 
 TEST_P(SignerTable, IsTakenForVerdict4Only) {
@@ -141,7 +141,7 @@ std::vector<ServerCase> serverCases() {
     return cases;
 }
 
-/// What the controller answers to a server of that chain. One whose chain makes no trust object gets no
+/// The controller's decision on a server with that chain. A chain that makes no trust object causes no
 /// challenge.
 bool letsIn(const Scene& scene, trust::TrustService& service, const ChainCase& one) {
     const auto certificates = parse(scene.list, service);

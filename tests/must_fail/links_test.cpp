@@ -1,5 +1,5 @@
-// Bundles of which one part is reached only through a link that leads out of the bundle: it is not there, and
-// nothing is written where the link leads. Around it all is as it should be.
+// Bundles with one part behind a link that leads out of the bundle. The part counts as missing, and nothing
+// is written at the link's target. Everything else is valid.
 #include <gtest/gtest.h>
 
 #include <filesystem>
@@ -22,7 +22,7 @@ namespace fs = std::filesystem;
 
 constexpr int kUnsigned = 66;    // no hash is found
 constexpr int kNoTicket = 65;    // none is stapled to it
-constexpr int kNotWritten = 73;  // the ticket cannot be put there
+constexpr int kNotWritten = 73;  // the ticket cannot be written there
 
 /// Which link takes the part's place.
 enum class Form { relative, absolute, throughAnother, outAndBackIn, staying };
@@ -80,7 +80,7 @@ void separatelySigned(const std::string& path) {
 }
 void framework(const std::string& path) {
     const Data executable = image();
-    // A directory, where others have a link: moved as it is, it still leads to the executable.
+    // A directory where others have a link: after a move it still leads to the executable.
     writeFile(path + "/Versions/Current/Sample", foundation::ByteView(executable));
 }
 
@@ -89,7 +89,7 @@ struct Part {
     const char* place;     // below the bundle
     const char* fileName;  // of the bundle
     void (*write)(const std::string& bundle);
-    int validates;  // what a validation ends with
+    int validates;  // the exit code of a validation
     int staples;
     bool mayStay = true;  // whether a link that stays in the bundle is followed there
 };
@@ -120,7 +120,7 @@ std::map<std::string, std::string> snapshot(const std::string& directory) {
     return files;
 }
 
-/// Moves the part away and puts a link of that form in its place.
+/// Moves the part away and replaces it by a link of that form.
 void replaceByLink(const std::string& bundle, const std::string& outside, const std::string& place,
                    Form form) {
     const fs::path part = fs::path(bundle) / place;
@@ -137,7 +137,7 @@ void replaceByLink(const std::string& bundle, const std::string& outside, const 
     }
     if (form == Form::throughAnother) {
         fs::create_symlink(kept, bundle + "/hop");
-        // By the text alone: the link itself is meant.
+        // Computed from the text alone: it refers to the link itself.
         target = fs::path(bundle + "/hop").lexically_relative(part.parent_path());
     }
     fs::create_symlink(target, part);
@@ -213,7 +213,7 @@ INSTANTIATE_TEST_SUITE_P(Accepted, LinkTable,
                                           testing::Values(Form::staying)),
                          nameOfCase);
 
-/// A link that takes the place of a directory while the service is asked.
+/// A link that replaces a directory during the lookup.
 class LateLinkTable : public LinkTable {};
 
 TEST_P(LateLinkTable, EndsWithItsExitCode) {

@@ -75,7 +75,7 @@ const std::string kHighest = std::string(64, 'F');
 // clang-format off
 std::vector<SignatureCase> writtenCases() {
     return {
-        // What is accepted, and why.
+        // Accepted cases, with the reason.
         {"Test", "nothing: as published, the low one of the two s", good(), true},
         {"Sample", "nothing: as published, and its s is the high one of the two", sequence(positive(kSampleR), positive(kSampleS)), true, "sample"},
         {"TestPadded", "nothing: zeros fill the field", padded(good()), true},

@@ -1,6 +1,6 @@
-// Artefacts of the three kinds with the hash that a ticket must list for them, and the tool run over them in
-// the test's own process: real files, real code signing, real trust over anchors of the test's choice, the
-// test in the place of the network.
+// Artefacts of the three kinds with their hash, and runs of the tool over them in the test's own
+// process: real files, real code signing, real trust with the test's anchors. The test replaces the
+// network.
 #pragma once
 
 #include <functional>
@@ -19,7 +19,7 @@ namespace pinwell::test {
 
 using foundation::Data;
 
-/// One artefact that could be had, ticket and all.
+/// One possible artefact, with its ticket.
 struct Subject {
     std::string name;      // of the kind, as a part of a test's name
     std::string fileName;  // with the kind's extension
@@ -37,7 +37,7 @@ struct Subject {
 const std::vector<Subject>& subjects();
 const Subject& subjectNamed(const std::string& name);
 
-/// Everything a run may find on disk, as one text: a file's bytes, of a bundle those of its ticket.
+/// The whole state on disk as one text: a file's bytes, or the bytes of a bundle's ticket.
 std::string contentsOf(const std::string& path);
 
 struct SignerAnchors {
@@ -52,15 +52,15 @@ class ToolRun {
   public:
     explicit ToolRun(const SignerAnchors& anchors);
 
-    /// Where artefacts may be put.
+    /// A path for an artefact.
     std::string path(const std::string& name) const { return platform_.directory / name; }
 
     int validate(const std::string& path, const std::string& answer);
-    /// `meanwhile` happens while the service is asked.
+    /// `meanwhile` runs during the lookup.
     int staple(const std::string& path, const std::string& answer,
                const std::function<void()>& meanwhile = {});
 
-    /// Whether the ticket on it passes the check that is made before the network is asked.
+    /// Whether its ticket passes the check before the lookup.
     bool passesOffline(const std::string& path);
 
   private:

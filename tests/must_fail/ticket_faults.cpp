@@ -125,7 +125,7 @@ const std::vector<TicketFault>& ticketFaults() {
         {"RevokedNoArtefact", "the revoked flag, and no hash", kRevoked, [](const S&, const I& i) { return of(i, Payload().revoked()); }},
         {"RevokedButNotSigned", "the revoked flag in a ticket that nobody signed", kRefused, [](const S& s, const I& i) { return SatchelBuilder::of(i, s.payload().revoked().build()).signature({}).build(); }},
         {"RevokedFlagCleared", "a revoked ticket whose flag was cleared afterwards", kRefused, [](const S& s, const I& i) { const Data t = of(i, s.payload().revoked()); return changed(t, payloadAt(s, t) + 12); }},
-        // Payload fields, signed as they are.
+        // Payload fields, signed in this form.
         {"PayloadMagic1", "the payload's first character", kRefused, [](const S& s, const I& i) { return of(i, s.payload().magic("n8tk")); }},
         {"PayloadMagic4", "the payload's fourth character", kRefused, [](const S& s, const I& i) { return of(i, s.payload().magic("m8tl")); }},
         {"PayloadMagicOfTheContainer", "the container's magic in the payload", kRefused, [](const S& s, const I& i) { return of(i, s.payload().magic("s8ch")); }},
@@ -148,7 +148,7 @@ const std::vector<TicketFault>& ticketFaults() {
         {"PayloadOf23Bytes", "a payload shorter than its header", kRefused, [](const S& s, const I& i) { Data p = s.payload().build(); p.resize(23); return SatchelBuilder::of(i, p).build(); }},
         {"PayloadShifted", "a byte in front of the payload", kRefused, [](const S& s, const I& i) { return SatchelBuilder::of(i, inserted(s.payload().build(), 0)).build(); }},
         {"PayloadTwice", "the payload twice", kRefused, [](const S& s, const I& i) { return SatchelBuilder::of(i, joined(s.payload().build(), s.payload().build())).build(); }},
-        // Container fields, signed as they are.
+        // Container fields, signed in this form.
         {"Magic1", "the container's first character", kRefused, [](const S& s, const I& i) { return satchel(s, i).magic("t8ch").build(); }},
         {"Magic2", "the container's second character", kRefused, [](const S& s, const I& i) { return satchel(s, i).magic("s9ch").build(); }},
         {"Magic3", "the container's third character", kRefused, [](const S& s, const I& i) { return satchel(s, i).magic("s8Ch").build(); }},
@@ -217,7 +217,7 @@ const std::vector<TicketFault>& ticketFaults() {
         {"SignatureFirstByte", "the signature's first byte is another", kRefused, [](const S& s, const I& i) { const Data t = satchel(s, i).build(); return changed(t, signatureAt(t)); }},
         {"SignatureMiddle", "a bit in the middle of the signature", kRefused, [](const S& s, const I& i) { const Data t = satchel(s, i).build(); return changed(t, signatureAt(t) + 36); }},
         {"SignaturePadding", "the padding behind the signature is not zero", kRefused, [](const S& s, const I& i) { return satchel(s, i).signatureSize(70).lastSignatureByte(1).build(); }},
-        // Anchors, around a ticket that is as it should be.
+        // Anchors, with a valid ticket.
         {"NoAnchors", "no anchors at all", kRefused, goodTicket, [](SignerAnchors& a) { a.roots.clear(); }},
         {"CompatibilityAnchorOnly", "the root is in compat-roots/ alone", kRefused, goodTicket, [](SignerAnchors& a) { a.roots.swap(a.compatibility); }},
         {"UsersAnchorOnly", "the user alone trusts the root", kRefused, goodTicket, [](SignerAnchors& a) { a.roots.swap(a.allowed); }},

@@ -15,14 +15,14 @@ struct TicketFault {
     const char* wrong;
     int exit;
     std::function<Data(const Subject&, const IssuedChain&)> ticket;
-    std::function<void(SignerAnchors&)> anchors = nullptr;  // of a ticket that is as it should be
+    std::function<void(SignerAnchors&)> anchors = nullptr;  // of a valid ticket
 
     friend void PrintTo(const TicketFault& fault, std::ostream* out) { *out << fault.wrong; }
 };
 
 const std::vector<TicketFault>& ticketFaults();
 
-/// As it should be.
+/// A valid ticket.
 Data goodTicket(const Subject& subject, const IssuedChain& chain);
 
 }  // namespace pinwell::test

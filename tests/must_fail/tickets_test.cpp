@@ -1,4 +1,4 @@
-// Tickets that must not be taken, on each kind of artefact and by each way that they can come.
+// Tickets that must be refused, on each kind of artefact and by each route.
 #include <gtest/gtest.h>
 
 #include "artefact_faults.h"
@@ -19,7 +19,7 @@ std::string answerWith(const Data& ticket) {
     return ControllerRun::inlineAnswer(ticket);
 }
 
-/// How the ticket comes.
+/// The route of the ticket.
 enum class Route {
     stapled,   // validate: the ticket on the artefact is at fault, the service's is good
     answered,  // validate: the ticket on the artefact is good, the service's is at fault
@@ -122,7 +122,7 @@ std::string goodTicketInBase64() {
 INSTANTIATE_TEST_SUITE_P(MustFail, AnswerTable, testing::ValuesIn(answerFaults(goodTicketInBase64())),
                          [](const auto& tested) { return tested.param.name; });
 
-/// What the tables stand on: with nothing wrong, each kind is let in on each way.
+/// The precondition of the tables: without a fault, each kind is accepted on each route.
 class GoodTicket : public testing::TestWithParam<Subject> {};
 
 TEST_P(GoodTicket, IsTaken) {

@@ -1,10 +1,10 @@
-# What the tests of the recipes share; sourced with the test's arguments:
+# Shared code of the tests of the recipes; sourced with the test's arguments:
 #
 #   PROGRAMS   the folder of pinwell and lumora-local
 #   PAGE       the page with the recipes
 #
-# Makes a temporary directory, goes there, and takes it away at the end along with the service. The recipes' own
-# surroundings are in it: release/ with a sample of every kind, and staple-and-validate, off the page as well.
+# Makes a temporary directory and changes to it. At the end it ends the service and removes the directory. The directory has
+# the recipes' surroundings: release/ with a sample of every kind, and staple-and-validate from the page.
 # shellcheck shell=bash
 set -euo pipefail
 # shellcheck source=../support/outcomes.bash
@@ -18,7 +18,7 @@ background=  # a process group
 work=$(mktemp -d)
 clean_up() {
   [ -z "$background" ] || kill -- "-$background" 2> /dev/null || true
-  # The order matters for one that has been stopped.
+  # The order matters for a stopped process.
   if [ -n "$service" ]; then
     kill "$service" 2> /dev/null || true
     kill -CONT "$service" 2> /dev/null || true
@@ -29,7 +29,7 @@ clean_up() {
 trap clean_up EXIT
 trap 'exit 1' INT TERM HUP
 
-# Nothing of the caller's own settings reaches the recipes.
+# The recipes get none of the caller's own settings.
 unset https_proxy HTTPS_PROXY all_proxy ALL_PROXY PARALLEL PARALLEL_SSH PINWELL_PLATFORM
 unset RETRY_ATTEMPTS RETRY_DELAY TIME_LIMIT KILL_AFTER SERVICE_HOST
 export LC_ALL=C HOME=$work/home TMPDIR=$work/tmp PATH=$programs:$PATH
@@ -59,13 +59,13 @@ write_step() {
   chmod +x staple-and-validate
 }
 
-# wait_for COMMAND...: until the command succeeds, for as long as ctest lets the test run.
+# wait_for COMMAND...: waits until the command succeeds; ctest limits the time.
 wait_for() {
   until "$@"; do command -p sleep 0.05; done
 }
 
 make_service() {
-  # Nobody listens on port 1, so that the service is out of reach until it has started.
+  # Nobody listens on port 1, so the service is unreachable until it starts.
   lumora-local init --host 127.0.0.1 --port 1 service > /dev/null
   lumora-local sample release > /dev/null
   export PINWELL_PLATFORM=$work/service/platform
