@@ -8,8 +8,8 @@
 //   p           the list itself is refused as a bad parameter
 //   -           the fault does not apply there
 //
-// A certificate fault has "ticket pinned compatibility", each leaf, intermediate, root: "444 555 555". A chain
-// fault has one for each policy: "5 5 4". If a policy accepts a fault, the text gives the reason.
+// A certificate fault has "ticket pinned compatibility", each leaf, intermediate, root: "444 555 555". A
+// chain fault has one for each policy: "5 5 4". If a policy accepts a fault, the text gives the reason.
 #pragma once
 
 #include <functional>

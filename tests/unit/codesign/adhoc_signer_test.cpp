@@ -79,7 +79,7 @@ TEST(OpaqueCodeDirectory, OfADiskImageHasSixSpecialSlots) {
     EXPECT_EQ(layOutOpaqueCodeDirectory({"ADHOC", 4096, trailer, content}), expected);
 }
 
-/// The long form, of a limit of 4 GiB; `trailerSlots` stand in front of the slots that every signature has.
+/// The long form, with a limit of 4 GiB; `trailerSlots` come before the slots of every signature.
 Data expectedLongForm(std::uint32_t specialSlots, const Data& trailerSlots, const Data& contentDigest) {
     return ByteWriter()
         .be32(0xFADE0C02)

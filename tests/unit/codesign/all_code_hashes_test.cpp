@@ -9,7 +9,7 @@ namespace {
 
 using codesign::kSuccess;
 
-/// Valid in form, but neither ad hoc nor signed by anybody.
+/// Valid in form, but neither ad hoc nor with a signer.
 Data invalidImage() {
     const Data codeDirectory = CodeDirectoryBuilder().flags(0).build();
     return ExecutableImageBuilder().signature(SuperBlobBuilder().blob(0, codeDirectory).build()).build();
@@ -17,7 +17,7 @@ Data invalidImage() {
 
 class AllCodeHashes : public CodeSigningTest {
   protected:
-    /// The identifiers of what was found, in order.
+    /// The identifiers found, in order.
     std::vector<std::string> identifiersAt(const std::string& path, codesign::Status expected = kSuccess) {
         std::vector<codesign::SigningInformation> all;
         EXPECT_EQ(service.copyAllCodeHashes(foundation::URL::fileURLWithPath(path), all), expected);

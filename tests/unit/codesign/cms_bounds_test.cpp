@@ -1,5 +1,5 @@
-// What a signer's message may hold: each rule that bounds the work of verifying it, and each that says what
-// its parts must be. Around real signatures, which the same message without the fault shows to verify.
+// The rules for a signer's message: each rule that bounds the work of verifying it, and each rule about its
+// parts. The signatures are real: the same message without the fault verifies.
 #include <gtest/gtest.h>
 
 #include <algorithm>

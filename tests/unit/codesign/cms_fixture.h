@@ -1,4 +1,4 @@
-// What the tests of a signer's message are about: one content, and a good message over it in parts.
+// The subject of the tests of a signer's message: one content, and a valid message over it in parts.
 #pragma once
 
 #include <string_view>

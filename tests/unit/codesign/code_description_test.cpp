@@ -1,4 +1,4 @@
-// Descriptions of code are read tolerantly; what they say of good code is what the service says.
+// Descriptions of code are read tolerantly; for good code they agree with the service.
 #include "codesign/code_description.h"
 
 #include <gmock/gmock.h>

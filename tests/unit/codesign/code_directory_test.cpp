@@ -122,7 +122,7 @@ TEST(CodeDirectory, RefusesAnIdentifierInItsHeader) {
 }
 
 TEST(CodeDirectory, RefusesAnIdentifierWithoutEnd) {
-    // The code slots at the end hold no zero byte.
+    // The code slots at the end contain no zero byte.
     expectRefused(CodeDirectoryBuilder().identifierOffset(sizeOf(CodeDirectoryBuilder()) - 3));
 }
 
@@ -145,7 +145,7 @@ TEST(CodeDirectory, RefusesMoreCodeSlotsThanItHolds) {
 TEST(CodeDirectory, RefusesMoreSpecialSlotsThanItHolds) {
     const auto builder = CodeDirectoryBuilder().specialSlot(1, Data(32, std::byte{1}));
     expectRefused(CodeDirectoryBuilder(builder).specialSlotCount(0xFFFFFFFF));
-    // Header (88) and strings (19) leave room for one digest, not for two behind the header.
+    // Header (88) and strings (19) leave space for one digest, not for two after the header.
     expectRefused(CodeDirectoryBuilder(builder).specialSlotCount(2));
 }
 

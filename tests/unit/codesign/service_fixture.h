@@ -1,4 +1,4 @@
-// A service over a directory of the test's own, and the questions the tests ask it.
+// A service over a temporary directory, and the tests' calls to it.
 #pragma once
 
 #include <gtest/gtest.h>
@@ -16,7 +16,7 @@
 
 namespace pinwell::test {
 
-/// What the service says about one path.
+/// The service's result for one path.
 struct Answer {
     codesign::Status created = codesign::kSuccess;
     codesign::Status validity = codesign::kSuccess;

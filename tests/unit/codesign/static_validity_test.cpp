@@ -1,4 +1,4 @@
-// What makes a signature valid, asked of the service with whole files.
+// The conditions of a valid signature, tested through the service with whole files.
 #include "service_fixture.h"
 #include "support/cms_signer.h"
 #include "support/disk_image_builder.h"
@@ -249,7 +249,7 @@ TEST_F(StaticValidity, RefusesAMalformedCmsBlob) {
 
 class DiskImageValidity : public StaticValidity {
   protected:
-    // Of an image whose signature demands this trailer.
+    // The validity of an image whose signature requires this trailer.
     codesign::Status validityCovering(const DiskImageBuilder& trailer) {
         const Data directory = CodeDirectoryBuilder().covers(6, trailer.trailer()).build();
         return askAbout(DiskImageBuilder().superblob(SuperBlobBuilder::adHoc(directory)).build()).validity;

@@ -176,7 +176,7 @@ TEST(SuperBlobInAFile, RefusesAnAreaBeyondTheFile) {
     EXPECT_THROW(readSuperBlob(MemorySource(Data(100)), 0xFFFFFFFFFFFFFFFF, 12), CodeError);
 }
 
-// A file of zeros behind the blobs.
+// A file with zeros after the blobs.
 TEST(SuperBlobInAFile, TakesMemoryForWhatIsThereWhateverItsLength) {
     const TemporaryDirectory directory;
     const std::string path = directory / "signed";

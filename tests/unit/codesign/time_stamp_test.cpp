@@ -1,4 +1,4 @@
-// The time-stamp token of a signer's message: the bounds that hold for it, and its time.
+// The time-stamp token of a signer's message: its bounds and its time.
 #include <gtest/gtest.h>
 
 #include "cms_fixture.h"
@@ -18,7 +18,7 @@ constexpr std::string_view kTimeStampToken = "\x2A\x86\x48\x86\xF7\x0D\x01\x09\x
 
 class TokenBounds : public testing::Test {
   protected:
-    /// A message whose time-stamp token is changed like this.
+    /// A message with a changed time-stamp token.
     static Data stamped(const std::function<void(CmsParts& token)>& change) {
         CmsParts parts = goodParts();
         const ByteView value = derContents(signerOf(parts).signature);
@@ -27,7 +27,7 @@ class TokenBounds : public testing::Test {
         signerOf(parts).unsignedAttributes = {attributeOf(kTimeStampToken, {token.build()})};
         return parts.build();
     }
-    /// The signature stays as it is; the time does not count.
+    /// The signature stays the same; the time does not count.
     static void expectNoTime(const std::function<void(CmsParts& token)>& change) {
         const Data message = stamped(change);
         EXPECT_EQ(secureTimestamp(message), std::nullopt);

@@ -11,7 +11,7 @@ using testing::ElementsAre;
 
 class Cloning : public FilesTest {
   protected:
-    // The answer for a file of these contents, after checking that asking has left no trace.
+    // The result for a file with these contents; also checks that the probe leaves no trace.
     bool answerOn(const Volume& volume, const std::string& contents) {
         const std::string file = volume / "file";
         writeFile(file, contents);
@@ -77,7 +77,7 @@ TEST_F(Cloning, CannotBeAskedOfAFileThatMayNotBeRead) {
     EXPECT_THAT(manager->volumeSupportsCloning(url("file")), FailsWith(EACCES, path("file")));
 }
 
-// Asking makes nothing, so that the run goes on to find that it cannot make a directory there.
+// The probe makes nothing, so the run continues and finds that it cannot make a directory there.
 TEST_F(Cloning, IsAskedInADirectoryThatMayNotBeWritten) {
     const Volume volume("xfs");
     if (volume.missing()) GTEST_SKIP() << *volume.missing();
@@ -93,7 +93,7 @@ TEST_F(Cloning, IsAskedInADirectoryThatMayNotBeWritten) {
     EXPECT_THAT(manager->createReplacementDirectory(file), FailsWith(EACCES, volume / "folder"));
 }
 
-// The kernel does not say what the file system could do with it; its directory still lets it be replaced.
+// The kernel does not report the file system's abilities for it; its directory still allows a replacement.
 TEST_F(Cloning, IsAskedOfAnothersFileThatMayOnlyBeRead) {
     const Volume volume("xfs");
     if (volume.missing()) GTEST_SKIP() << *volume.missing();

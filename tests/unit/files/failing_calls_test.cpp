@@ -1,5 +1,5 @@
-// Whatever call fails: the error comes out, the old file or the new one is there, nothing half made stays,
-// and no file is left open.
+// Whichever call fails: the error is reported, the old or the new file is there, no incomplete file remains,
+// and no file stays open.
 #include "support/failing_calls.h"
 
 #include <cerrno>
@@ -28,7 +28,7 @@ using testing::StartsWith;
 
 class FailingCalls : public FilesTest {
   protected:
-    // How an attempt went: nothing when it succeeded, otherwise its errno.
+    // The outcome of an attempt: `nullopt` on success, otherwise its errno.
     using Attempt = std::function<std::optional<std::int64_t>()>;
 
     template <class T>
@@ -38,8 +38,8 @@ class FailingCalls : public FilesTest {
         return result.error().code();
     }
 
-    // Makes the attempt once for every call in it, with that call failing; `check` learns the call and the
-    // outcome. Answers the names of the calls that failed.
+    // Makes the attempt once for every call in it, with that call failing; `check` gets the call and the
+    // outcome. Returns the names of the failed calls.
     std::set<std::string> failEachCall(const std::function<void()>& prepare, const Attempt& attempt,
                                        const std::function<void(const std::string&, bool)>& check) {
         std::set<std::string> names;
@@ -166,7 +166,7 @@ TEST_F(FailingCalls, InAReplacementLeaveTheOldFileOrTheNewOne) {
     const auto calls = failEachCall(
         [&] {
             prepareFiles();
-            // By another manager: the one that makes a replacement directory holds it open.
+            // By another manager: the one that makes a replacement directory keeps it open.
             const auto made =
                 files::makeLocalFileManager(plainTypeNaming)->createReplacementDirectory(url("original"));
             copy = made->appendingPathComponent("original");
@@ -226,7 +226,7 @@ TEST_F(FailingCalls, InAPlainWriteLeaveAWholeNewFileOrNone) {
                 IsSubsetOf(calls));
 }
 
-// A flush of the file alone would leave its name to chance.
+// A flush of the file alone would not make its name durable.
 TEST_F(FailingCalls, OrNotANewFileIsFlushedAndThenItsDirectory) {
     const URL original = url("folder/original");
     struct Row {
@@ -309,7 +309,7 @@ TEST_F(FailingCalls, InTheQuestionOfCloningMeanNoWhereTheKernelSaysNotHere) {
 TEST_F(FailingCalls, InTheMakingOfAReplacementDirectoryLeaveNone) {
     const auto calls = failEachCall([&] { prepareFiles(); },
                                     [&] {
-                                        // Holds the directory that it makes for as long as it lives.
+                                        // Keeps the directory that it makes open during its life.
                                         const auto fresh = files::makeLocalFileManager(plainTypeNaming);
                                         return outcome(fresh->createReplacementDirectory(url("original")));
                                     },
@@ -378,7 +378,7 @@ TEST_F(FailingCalls, OfAHandleComeOutWithWhatWasTried) {
     }
 }
 
-// All that the file manager does with files, once each.
+// All operations of the file manager on files, once each.
 void doAll(FileManager& manager, const TemporaryDirectory& directory) {
     const URL file = directory.url("file");
     const std::string contents = irregularBytes(5000);

@@ -31,8 +31,8 @@ void AsOrdinaryUser::give(const std::string& directory) {
 }
 
 void AsOrdinaryUser::dropRights() {
-    // A superuser's login is in the superuser's group besides, and what that group may do, an ordinary user
-    // may not.
+    // A superuser's login is also in the superuser's group, and an ordinary user must not have that group's
+    // rights.
     const int count = getgroups(0, nullptr);
     must(count >= 0, "counting the groups");
     groups_.resize(static_cast<std::size_t>(count));

@@ -1,5 +1,5 @@
-// What the tests of the file service share: a directory of their own, a file manager, and short words for
-// looking at files.
+// Shared code of the tests of the file service: a temporary directory, a file manager, and short functions to
+// read files.
 #pragma once
 
 #include <gmock/gmock.h>
@@ -17,11 +17,11 @@
 
 namespace pinwell::test {
 
-/// The extended attribute that an access control list is kept in.
+/// The extended attribute with an access control list.
 inline constexpr const char* kAccessControlList = "system.posix_acl_access";
 
-/// Rights of an ordinary user for as long as it lives, with `directories` given to that user. Nothing is
-/// changed in a test run that is an ordinary user's anyway.
+/// Has an ordinary user's rights during its life, and gives `directories` to that user. It changes nothing if
+/// an ordinary user runs the tests.
 class AsOrdinaryUser {
   public:
     template <class... Directories>
@@ -48,7 +48,7 @@ std::size_t openFileCount();
 class FilesTest : public testing::Test {
   protected:
     FilesTest();
-    ~FilesTest() override;  // opens what a test has closed, so that all can be removed
+    ~FilesTest() override;  // makes a test's closed directories readable, to remove them
 
     std::string path(std::string_view name) const { return directory / name; }
     files::URL url(std::string_view name) const { return directory.url(name); }
@@ -68,7 +68,7 @@ MATCHER_P2(FailsWith, reason, path, "fails with errno " + testing::PrintToString
            arg.error().localizedDescription().starts_with(std::string(path) + ": ");
 }
 
-/// Matches a success; says why it is none.
+/// Matches a success; otherwise prints the error.
 MATCHER(Succeeds, "succeeds") {
     if (!arg) *result_listener << arg.error().localizedDescription();
     return arg.has_value();

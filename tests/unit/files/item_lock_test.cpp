@@ -1,4 +1,4 @@
-// One writer at a time, also when the file they wait for is replaced meanwhile.
+// One writer at a time, even if the file is replaced while they wait.
 #include "files/item_lock.h"
 
 #include <fcntl.h>
@@ -68,7 +68,7 @@ TEST_F(Lock, SaysOnceThatItWaits) {
 }
 
 TEST_F(Lock, IsNotTakenWhereItWouldBlockOthers) {
-    // As linux/magic.h has them: SMB, CIFS and SMB2, also where the field is signed and of 32 bits.
+    // The values of linux/magic.h: SMB, CIFS and SMB2, even if the field is signed and has 32 bits.
     for (const std::int64_t type : {std::int64_t{0x517B}, std::int64_t{0xFF534D42}, std::int64_t{0xFE534D42},
                                     std::int64_t{static_cast<std::int32_t>(0xFF534D42)}})
         EXPECT_TRUE(files::hasMandatoryLocks(type)) << std::hex << type;

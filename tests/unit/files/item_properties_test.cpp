@@ -14,7 +14,7 @@ using testing::UnorderedElementsAre;
 
 class ItemProperties : public FilesTest {
   protected:
-    // The facts that the type service is asked with.
+    // The facts passed to the type service.
     ItemFacts factsOf(std::string_view name) {
         ItemFacts seen;
         const auto asking = files::makeLocalFileManager([&seen](const ItemFacts& facts) {

@@ -1,4 +1,5 @@
-// The fake that other tests lean on: it must record all, fail what it is told to, and pass on the rest.
+// Tests the fake that other tests use: it must record every call, fail on demand, and pass on all other
+// calls.
 #include "fixture.h"
 #include "support/fake_file_manager.h"
 

@@ -21,8 +21,8 @@
 namespace pinwell::test {
 namespace {
 
-// For as long as it lives, the leak detector looks away: where the move into the trash itself is refused,
-// GLib 2.74 does not free the texts of the info file.
+// During its life, the leak detector is off: if the move into the trash itself is refused, GLib 2.74 does not
+// free the texts of the info file.
 class KnownLeaks {
   public:
 #ifdef PINWELL_ADDRESS_SANITIZER
@@ -156,7 +156,7 @@ TEST_F(Trash, RefusesAVolumeThatHasNone) {
 }
 
 TEST_F(Trash, LeavesTheItemWhereItMayNotBeMoved) {
-    std::filesystem::remove_all(*home / "data");  // another test's trash would be another user's
+    std::filesystem::remove_all(*home / "data");  // another test's trash could be another user's
     const AsOrdinaryUser user(directory.path(), home->path());
     writeFile(path("closed/file"), "x");
     setMode(path("closed"), 0500);

@@ -50,7 +50,7 @@ class Beneath : public testing::TestWithParam<Way> {
         return GetParam().open(root_.get(), relative, flags, 0600);
     }
 
-    // What is read there, or the reason why nothing is.
+    // The contents read there, or the reason for a failure.
     std::string at(const std::string& relative, int flags = O_RDONLY) const {
         const FileDescriptor file = open(relative, flags);
         if (!file) return std::generic_category().message(errno);
@@ -100,7 +100,7 @@ TEST_P(Beneath, RefusesLinksThatLeadOut) {
     EXPECT_EQ(at("indirect/file"), reason(EXDEV));
 }
 
-// They would lead somewhere else once the directory is moved.
+// After a move of the directory they would lead somewhere else.
 TEST_P(Beneath, RefusesAbsoluteLinksThatLeadBackIn) {
     makeLink(path("a"), path("absolute"));
     EXPECT_EQ(at("absolute/b/file"), reason(EXDEV));
@@ -159,7 +159,7 @@ TEST_P(Beneath, ClosesWithTheProgramThatIsStarted) {
     EXPECT_EQ(fcntl(file.get(), F_GETFD), FD_CLOEXEC);
 }
 
-// Whoever owns the directory moves it about meanwhile. What is opened is inside, or nothing is.
+// The directory's owner moves it during the test. The opened file is inside, or none is opened.
 TEST_P(Beneath, IsNeverLedOutByADirectoryThatIsSwappedForALink) {
     makeLink(outside(), path("swap"));
     std::atomic<bool> stop = false;

@@ -15,7 +15,7 @@ using testing::HasSubstr;
 
 constexpr std::uint64_t kHuge = std::numeric_limits<std::uint64_t>::max();
 
-// The message of the ShortRead that `read` throws, or what happened instead.
+// The message of the ShortRead that `read` throws, or a note that it threw none.
 template <class Read>
 std::string shortage(Read read) {
     try {

@@ -21,7 +21,7 @@ class HeldPlaces : public testing::Test {
   protected:
     std::string path(std::string_view name) const { return directory_ / name; }
 
-    // What is read at that place, or the name of the reason why nothing is.
+    // The contents read at that place, or the name of the reason for a failure.
     std::string at(std::string_view name) const {
         const auto place = places_.find(path(name));
         if (!place) return place.error().localizedFailureReason();
@@ -79,7 +79,7 @@ TEST_F(HeldPlaces, FindsAHeldFileInTheDirectoryThatWasOpened) {
     std::filesystem::rename(path("held"), path("moved"));
     makeLink("other", path("held"));
     EXPECT_EQ(at("held/file"), "held");
-    // Its siblings, but nothing below them: whoever named a temporary directory there named it as it is.
+    // Its siblings are found in the held directory. Deeper paths are resolved again, as they are written.
     writeFile(path("moved/sibling"), "sibling");
     writeFile(path("other/below/file"), "below");
     EXPECT_EQ(at("held/sibling"), "sibling");

@@ -1,5 +1,5 @@
-// Prints who asks, with whose rights, and which platform directory they get. A program of its own, so that a
-// test can give a copy of it the set-user-ID bit.
+// Prints its real and effective user, and their platform directory. It is a separate program, so that a test
+// can give a copy of it the set-user-ID bit.
 #include <unistd.h>
 
 #include <iostream>

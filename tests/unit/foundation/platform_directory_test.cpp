@@ -108,7 +108,7 @@ TEST(PlatformDirectory, IsTheInstalledOneOtherwise) {
     }
 }
 
-// What a copy of the probe prints that another user starts, with PINWELL_PLATFORM set.
+// The output of a copy of the probe, started by another user with PINWELL_PLATFORM set.
 std::string probedByAnotherUser(const std::string& probe) {
     constexpr const char* kOther = "65534";
     const auto result =

@@ -46,7 +46,7 @@ Value parsedXML(std::string_view body) {
     return parsed(asBytes(xml(body)));
 }
 
-// Lays out a binary list object by object; every number of the trailer can be told to lie.
+// Lays out a binary list object by object; every number of the trailer can be false.
 class BinaryList {
   public:
     BinaryList() { writer_.text("bplist00"); }

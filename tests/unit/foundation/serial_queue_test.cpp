@@ -96,7 +96,7 @@ TEST(SerialQueue, KnowsItsOwnThread) {
     EXPECT_FALSE(queue.isCurrent());
 }
 
-// Hands in work when it is destroyed, as an object that a piece of work owns may do.
+// Submits work in its destructor, like an object that a task may own.
 struct LastWord {
     SerialQueue& queue;
     int& said;

@@ -83,7 +83,7 @@ TEST_F(Deferral, LeavesASignalToOthersIfTheThreadThatEndsItBlocksIt) {
         pthread_sigmask(SIG_BLOCK, &blocked, nullptr);
         deferral.reset();
     }).join();
-    while (taken == 0) std::this_thread::yield();  // this thread is told, and takes it when it next can
+    while (taken == 0) std::this_thread::yield();  // this thread has to take the signal
     EXPECT_EQ(taken, 1);
 }
 
@@ -109,7 +109,7 @@ TEST_F(Deferral, MayLiveInManyThreadsAtOnce) {
     EXPECT_GT(taken, 1);
 }
 
-// A thread may run the handler late: the kernel chose it while the deferral lived.
+// A thread may run the handler late: the kernel chose it during the deferral's life.
 class DeferralWithALateHandler : public Deferral {
   protected:
     static auto handler() {

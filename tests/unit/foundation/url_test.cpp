@@ -34,7 +34,7 @@ TEST(FileURL, TakesRelativePathsAgainstTheCurrentDirectory) {
 }
 
 TEST(FileURL, NeverHangsARelativePathBelowTheRoot) {
-    // In a process of its own, since the current directory belongs to all tests of this one.
+    // In a separate process, because all tests of this one share the current directory.
     const test::TemporaryDirectory directory;
     const std::string doomed = directory / "doomed";
     std::filesystem::create_directory(doomed);

@@ -12,7 +12,7 @@ using testing::ElementsAre;
 using testing::HasSubstr;
 using XMLDocumentType = XMLParser::DocumentType;
 
-// Writes down what it meets.
+// Records its events.
 class RecordedXML : public XMLEvents {
   public:
     void begin(std::string_view name, const XMLAttributes& attributes) override {
@@ -133,7 +133,7 @@ TEST(XMLParser, RefusesOtherEncodings) {
     EXPECT_EQ(documentRefusal(std::string_view("\xFE\xFF\0<\0a\0/\0>", 10)), "encoding");
 }
 
-// One reader would believe the mark and another one the declaration.
+// One reader would follow the mark, and another one the declaration.
 TEST(XMLParser, RefusesAByteOrderMarkBeforeAnotherEncoding) {
     EXPECT_EQ(documentText("\xEF\xBB\xBF<?xml version='1.0' encoding='UTF-8'?><a>\xC3\xA9</a>"), "\xC3\xA9");
     EXPECT_EQ(documentRefusal("\xEF\xBB\xBF<?xml version='1.0' encoding='ISO-8859-1'?><a>\xC3\xA9</a>"),
@@ -155,7 +155,7 @@ TEST(XMLParser, RefusesADocumentTypeUnlessTheCallerTakesOne) {
     }
 }
 
-// With a document type that was not read, an entity may be declared for all that the library knows.
+// With an unread document type, the library must assume that any entity may be declared.
 TEST(XMLParser, RefusesUndeclaredEntitiesBehindADocumentTypeToo) {
     EXPECT_THAT(documentRefusal("<!DOCTYPE a SYSTEM 'b'><a>&c;</a>", XMLDocumentType::withoutDeclarations),
                 HasSubstr("entity"));
