@@ -1,4 +1,4 @@
-// A batch from its list to its last report, with fakes in the place of the network and the signatures.
+// A batch from its list to its last report, with fakes for the network and the signatures.
 #include "batch/coordinator.h"
 
 #include <fcntl.h>
@@ -189,7 +189,7 @@ TEST_F(Coordination, TellsTheStateOfTheFilesAsTheRunLeftThem) {
     EXPECT_EQ(filesStates.at(paths[0]), left);
 }
 
-// What is left out.
+// Artefacts that are left out.
 
 TEST_F(Coordination, BeginsOnlyWhatIsWanted) {
     Names paths = writeBundles(2);
@@ -262,7 +262,7 @@ TEST_F(Coordination, AsksAgainForWhatIsNotIssuedYet) {
 TEST_F(Coordination, TheDeadlineEndsWhatWaitsAndWhatIsNotBegun) {
     settings.deadline = Seconds(0.05);
     sessions.answerBy([](const https::Request&) { return Reply{.neverComes = true}; });
-    // The names alone count: no more than so many are begun.
+    // Only the number of names counts: the batch begins no more than this.
     Names paths = writeBundles(2);
     paths.resize(2 + batch::kMostInWork, platform.directory / "missing.app");
     run(writeBundles(2));

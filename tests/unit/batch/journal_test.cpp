@@ -42,7 +42,7 @@ class Journals : public testing::Test {
         writeFile(file, contents);
         return Journal::open(file).asOptional().has_value();
     }
-    /// Whether a run that begins now would leave it out.
+    /// Whether a run that begins now would skip it.
     bool hasDone(const JournalItem& item) const { return opened().hasDone(item); }
     TemporaryDirectory directory;
     const std::string file = directory / "journal";

@@ -88,16 +88,15 @@ TEST_F(JUnit, TakesThePlaceOfNoDeviceAndNoFolder) {
     ASSERT_EQ(::mkfifo((directory / "pipe").c_str(), 0600), 0);
     std::filesystem::create_symlink("nowhere", directory / "link");
     std::filesystem::create_symlink("/dev/null", directory / "device");
-    for (const std::string& path :
-         {directory / "pipe", directory / "link", directory / "device", directory.path(),
-          std::string("/dev/null"), directory / "no/such"})
+    for (const std::string& path : {directory / "pipe", directory / "link", directory / "device",
+                                    directory.path(), std::string("/dev/null"), directory / "no/such"})
         EXPECT_FALSE(JUnitReport::begin(path)) << path;
     EXPECT_TRUE(std::filesystem::is_fifo(directory / "pipe"));
     EXPECT_TRUE(std::filesystem::is_symlink(directory / "device"));
     EXPECT_EQ(filesThere(), 3U);
 }
 
-// An option whose argument was forgotten takes the first artefact for it.
+// If the argument of an option is forgotten, the option takes the first artefact as its argument.
 TEST_F(JUnit, TakesThePlaceOfNoOtherFile) {
     for (const std::string& contents : {std::string("koly"), std::string("<"), std::string("a list\n")}) {
         writeFile(file, contents);

@@ -71,7 +71,7 @@ TEST_F(Selections, TakeAFileOfTwoNamesOnce) {
     std::filesystem::create_hard_link(directory / "a", directory / "b");
     EXPECT_EQ(selection.choose(directory / "a"), Choice::wanted);
     EXPECT_EQ(selection.choose(directory / "b"), Choice::namedBefore);
-    // The first name has another file now: what the second one leads to is a file of its own.
+    // The first name now has another file, so the second name's file is a different one.
     std::filesystem::remove(directory / "a");
     writeFile(directory / "a", "new");
     std::filesystem::create_hard_link(directory / "b", directory / "c");

@@ -1,4 +1,4 @@
-// What is said of all artefacts at the end.
+// The summary of all artefacts at the end.
 #include <gtest/gtest.h>
 
 #include "batch/report.h"

@@ -1,7 +1,7 @@
-// What operator new is asked for while this lives, by the thread that made it. One at a time.
+// Counts the requests to operator new during its life, by the thread that made it. One at a time.
 //
-// Tests of bounded work hold an input's cost against numbers that are counted (allocations, reads, steps),
-// never against a clock. A bound is a few times what is needed, and far below what the input claims.
+// Tests of bounded work compare an input's cost with counted numbers (allocations, reads, steps), never with
+// a clock. A bound is a few times the necessary work, and far below the input's claim.
 #pragma once
 
 #include <cstddef>
@@ -18,7 +18,7 @@ class AllocationCount {
     AllocationCount(const AllocationCount&) = delete;
     AllocationCount& operator=(const AllocationCount&) = delete;
 
-    std::size_t blocks() const;   // how many
+    std::size_t blocks() const;   // the number of requests
     std::size_t bytes() const;    // all together, freed ones included
     std::size_t largest() const;  // of one block, in bytes
 };

@@ -18,7 +18,7 @@ std::string inTable(const std::string& contents) {
     return "<xar><toc>" + contents + "</toc></xar>";
 }
 
-// Feeds a document as an archive does and answers how much of it was taken before it was refused.
+// Feeds a document in the way of an archive, and returns how much of it was read before the refusal.
 std::size_t takenOf(const std::string& document) {
     constexpr std::size_t kPiece = 64 * 1024;
     xar::TableOfContentsReader reader;
@@ -67,7 +67,7 @@ TEST(BoundedWork, TableWithEntitiesIsLeftAtTheDocumentType) {
         kPieceOfXML);
 }
 
-// Each is remembered by the XML library, whose memory is limited.
+// The XML library stores each name, and its memory is limited.
 TEST(BoundedWork, TableOfAMillionNamesIsLeftAtTheLimit) {
     std::string names;
     for (int i = 0; i < 1'000'000; ++i) names += "<file n" + std::to_string(i) + "=''/>";
@@ -80,7 +80,7 @@ TEST(BoundedWork, TableWithACommentOfSixteenMebibytesIsLeftAtTheLimit) {
               foundation::kMaximumXMLMemory);
 }
 
-// What is passed over is not kept.
+// Ignored elements are not stored.
 TEST(BoundedWork, TableOfAMillionFilesTakesNoMemoryForThem) {
     const std::string document = inTable(repeated("<file id='1'><name>n</name></file>", 1'000'000));
     const AllocationCount count;

@@ -99,7 +99,7 @@ TEST(BoundedWork, PropertyListWithEntitiesThatUnfoldIsRefused) {
     EXPECT_LE(count.bytes(), kMebibyte / 2) << "the piece that the parser takes at a time";
 }
 
-// Forty arrays, each of which holds the next one twice: 2^40 values in some hundred bytes.
+// Forty arrays, each with two references to the next: 2^40 values in some hundred bytes.
 TEST(BoundedWork, BinaryPropertyListThatUnfoldsIsRefused) {
     constexpr char kObjects = 40;
     std::string document = "bplist00";

@@ -19,10 +19,10 @@ using codesign::CodeError;
 using foundation::ByteWriter;
 using foundation::ShortRead;
 
-// Enough to say what is wrong.
+// Enough for an error message.
 constexpr std::size_t kRefusal = 4 * kKibibyte;
 
-// Bytes that say how often, and how many of them, were read.
+// Bytes that count the reads, and the bytes read.
 class CountingSource final : public codesign::ByteSource {
   public:
     explicit CountingSource(Data bytes, std::uint64_t size = 0)
@@ -35,7 +35,7 @@ class CountingSource final : public codesign::ByteSource {
     mutable std::size_t largest = 0;  // of one read
 
   private:
-    // What stands behind the bytes, up to the size, is zero.
+    // After the bytes, up to the size, all is zero.
     std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const override {
         ++reads;
         bytesRead += buffer.size();
@@ -62,7 +62,7 @@ bool isRefused(Step step) {
     }
 }
 
-// An index of that many entries, each of a blob that is a header alone.
+// An index of that many entries, each with a blob that is only a header.
 Data superblobOfHeaders(std::uint32_t count) {
     const std::uint32_t area = 12 + 8 * count;
     ByteWriter writer;
@@ -97,7 +97,7 @@ TEST(BoundedWork, SuperblobThatCountsBillionsOfBlobsIsRefusedByItsLength) {
     EXPECT_LE(count.bytes(), kRefusal);
 }
 
-// Every entry leads to the one blob that takes up all of the rest.
+// Every entry leads to the same blob, which takes up the whole rest.
 TEST(BoundedWork, SuperblobWhoseEntriesShareABlobDoesNotUnfold) {
     constexpr std::uint32_t kEntries = 1000;
     constexpr std::uint32_t kBlob = 12 + 8 * kEntries;
@@ -145,7 +145,7 @@ TEST(BoundedWork, UniversalImageOfBillionsOfSlicesIsLeftAfterItsHeader) {
     EXPECT_LE(source.bytesRead, 64 * kKibibyte);
 }
 
-// Three gigabytes of list that are nothing but a claim: the first entry that is not there ends it.
+// A claimed list of three gigabytes: the first missing entry ends it.
 TEST(BoundedWork, ListOfSlicesOverAHoleIsLeftAtItsFirstEmptyEntry) {
     const CountingSource source(UniversalImageBuilder().count(150'000'000).build(), std::uint64_t{1} << 40U);
     const AllocationCount count;

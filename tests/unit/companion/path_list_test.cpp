@@ -1,4 +1,4 @@
-// Lists of paths, read as they are worked on.
+// Lists of paths, read while the paths are processed.
 #include "companion/path_list.h"
 
 #include <fcntl.h>

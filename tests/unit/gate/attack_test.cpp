@@ -1,4 +1,4 @@
-// Changes to a bundle that no byte of a signed file shows, and packages whose table plays tricks.
+// Changes to a bundle outside the bytes of signed files, and packages with a hostile table.
 #include <gmock/gmock.h>
 #include <sys/stat.h>
 
@@ -28,7 +28,7 @@ class AttackedBundle : public GateTest {
         std::filesystem::permissions(bundle + "/" + below, static_cast<std::filesystem::perms>(mode));
     }
 
-    /// 65, with a failed check whose line holds this.
+    /// 65, with a failed check whose line contains this text.
     void expectRefusal(const std::string& place) const {
         const Result result = judge(bundle);
         EXPECT_EQ(gate::exitStatusOf(result.verdict), 65) << place;

@@ -1,5 +1,5 @@
-// Every byte of an artefact of each kind, changed by itself. What a run admits in spite of it is listed here,
-// and in docs/deep-verification.md with the reason.
+// Every byte of an artefact of each kind, changed by itself. This file lists the changes that a run does not
+// notice. docs/deep-verification.md gives the reasons.
 #include <gmock/gmock.h>
 
 #include <filesystem>
@@ -29,7 +29,7 @@ using verify::Workers;
 
 constexpr foundation::Date kNow{1'795'204'500};
 
-/// Another bit for each of eight bytes, so that no field is changed in its sign or its parity alone.
+/// Another bit in each of eight bytes, so that no field changes only in its sign or its parity.
 std::byte maskAt(std::size_t at) {
     return std::byte{1} << (at % 8);
 }
@@ -45,8 +45,8 @@ bool isCaught(const Data& bytes, const Verification& verification) {
 
 class EveryByte : public GateTest {
   protected:
-    /// The places in `file` at which a change is not answered with 65, a line each: "OFFSET: STATUS". Deep
-    /// verification alone catches most, in memory; the rest goes through a whole run over `artefact`.
+    /// The places in `file` where a change does not give 65, a line each: "OFFSET: STATUS". Deep verification
+    /// alone finds most changes, in memory; a whole run over `artefact` finds the rest.
     std::vector<std::string> survivors(const std::string& artefact, const std::string& file,
                                        const Verification& verification = {}) const {
         EXPECT_EQ(exitStatusFor(artefact), 0);
@@ -161,14 +161,14 @@ TEST_F(EveryByteOfCode, OfEveryOtherFileOfABundleCounts) {
         EXPECT_THAT(survivors(bundle, bundle + "/Contents/" + file), IsEmpty()) << file;
 }
 
-/// The places of the subject in certificates that are signed by themselves: with another subject than issuer,
-/// and no key identifier, they are like any whose issuer is not there.
+/// The subject's place in self-signed certificates. With another subject than issuer, and without a key
+/// identifier, they are like any certificate whose issuer is missing.
 class SelfSigned : public EveryByteOfCode {
   protected:
-    /// Of these survivors, those elsewhere.
+    /// The survivors outside these places.
     std::vector<std::string> outsideOfSubjects(const std::vector<std::string>& found) const {
         constexpr std::string_view kSubject = "Test signer";
-        constexpr std::size_t kAround = 6;  // its type, and what it begins with
+        constexpr std::size_t kAround = 6;  // its type, and its first bytes
         const std::string contents = readFile(executable);
         std::vector<std::string> others;
         for (const std::string& one : found) {

@@ -1,5 +1,5 @@
-// Artefacts as a consumer gets them: samples of the record service, stapled by the tool's own functions with
-// tickets of a root that the platform trusts. What is real here is everything but the network.
+// Artefacts in the form that a consumer gets: samples of the record service, stapled by the tool's own
+// functions, with tickets of a trusted root. Everything except the network is real.
 #pragma once
 
 #include <gtest/gtest.h>

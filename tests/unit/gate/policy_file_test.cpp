@@ -1,4 +1,4 @@
-// Policy files, as their authors get them wrong.
+// Policy files with their authors' mistakes.
 #include <gmock/gmock.h>
 #include <sys/stat.h>
 
@@ -25,7 +25,7 @@ class PolicyFile : public testing::Test {
         return gate::readPolicyFile(path);
     }
 
-    /// What is said of the file; nothing if it is read.
+    /// The complaint about the file; empty if it can be read.
     std::string fault() const {
         try {
             static_cast<void>(gate::readPolicyFile(path));
@@ -132,7 +132,7 @@ TEST_F(PolicyFile, IsRefusedIfItIsHugeOrDeep) {
     EXPECT_THAT(faultOf("a = {" + dotted + " = 1}\n"), StartsWith(path + ":1: "));
     EXPECT_THAT(faultOf("a = " + std::string(gate::kMaximumPolicyFile - 5, '[') + "\n"),
                 StartsWith(path + ":1: "));
-    // As deep as it gets: inline tables of keys of as many parts as there may be.
+    // The deepest possible form: inline tables of keys with the highest number of parts.
     std::string tables;
     for (int i = 0; i < 300; ++i) tables += "{a.a.a.a = ";
     EXPECT_THAT(faultOf("a = " + tables + "\n"), StartsWith(path + ":1: "));

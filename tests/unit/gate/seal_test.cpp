@@ -1,4 +1,4 @@
-// What a bundle's seal may hold.
+// The permitted contents of a bundle's seal.
 #include "verify/seal.h"
 
 #include <gmock/gmock.h>
@@ -24,7 +24,7 @@ TEST(Seal, TakesWeightsThatAreNumbers) {
         EXPECT_TRUE(sealWithRule(value).ruleFor("a").has_value()) << value;
 }
 
-// No order of rules would follow from it.
+// Without a number there is no order of rules.
 TEST(Seal, RefusesAWeightThatIsNoNumber) {
     for (const char* const value :
          {"<real>nan</real>", "<dict><key>weight</key><real>-nan</real></dict>",

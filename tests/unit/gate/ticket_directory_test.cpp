@@ -24,7 +24,7 @@ class FetchedTickets : public GateTest {
         writeFile(directory / "tickets/unrelated", "");
     }
 
-    /// Puts these bytes where the ticket of the image is looked for.
+    /// Writes these bytes to the path of the image's ticket.
     void fetch(ByteView ticket) const {
         writeFile(directory / ("tickets/2-2-" + foundation::toHex(stapledResult.codeHash) + ".ticket"),
                   ticket);
@@ -34,7 +34,7 @@ class FetchedTickets : public GateTest {
     }
     TicketPayloadBuilder payload() const { return TicketPayloadBuilder().entry(2, stapledResult.codeHash); }
 
-    /// The result, whose check of the fetched ticket has this outcome.
+    /// Expects this result, with this outcome of the check of the fetched ticket.
     void expect(int exitStatus, std::string_view check, Outcome outcome) const {
         const TicketDirectory tickets(directory / "tickets");
         const Result result = judge(image, &tickets);

@@ -1,4 +1,4 @@
-// Who a session says it is.
+// The identity of a session.
 #include "https/client_identity.h"
 
 #include <openssl/bio.h>
@@ -44,7 +44,7 @@ class ClientIdentityTest : public SessionTest {
         writeFile(key, chain.leaf.key.pem());
     }
 
-    /// What is wrong with the files; empty if nothing is.
+    /// The fault of the files; empty if they have none.
     std::string fault() const {
         const auto identity = ClientIdentity::read(certificate, key);
         return identity ? std::string() : identity.error().localizedDescription();
@@ -107,7 +107,7 @@ TEST_F(ClientIdentityTest, OfAnotherAuthorityEndsWithTheServersObjection) {
     ChainFields other = ServerChain("ci.example");
     other.root.key = SigningKey::cached(KeyKind::p256, "other authority");
     other.root.subject = commonName("Other Authority");
-    version = TLSVersion::tls12;  // where the objection always comes before the request goes
+    version = TLSVersion::tls12;  // here the refusal always comes before the request is sent
     HostileServer asking(identity(), demanding(other.issue().root));
     expectFailure(fetch(asking.url()), URLErrorCode::secureConnectionFailed,
                   "does not accept this client's certificate (unknown CA)");

@@ -22,7 +22,7 @@ sockaddr_in loopback(std::uint16_t port) {
     return address;
 }
 
-// Passes on what is there; false at the end of either side.
+// Passes on the available bytes; returns false at the end of either side.
 bool pass(int from, int to) {
     std::array<char, 16384> buffer{};
     const ssize_t count = ::recv(from, buffer.data(), buffer.size(), 0);

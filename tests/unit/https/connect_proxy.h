@@ -14,8 +14,8 @@ namespace pinwell::test {
 
 class ConnectProxy {
   public:
-    /// Answers every CONNECT with this status, and with 200 connects to that port of the loopback address
-    /// whatever host was asked for.
+    /// The response to every CONNECT has this status. With 200 it connects to that port of the loopback
+    /// address, whatever the requested host.
     explicit ConnectProxy(std::uint16_t targetPort, int status = 200);
     ~ConnectProxy();
     ConnectProxy(const ConnectProxy&) = delete;

@@ -1,4 +1,4 @@
-// What a data task sends and what it makes of ordinary answers.
+// The request of a data task, and its results for ordinary responses.
 #include "session_fixture.h"
 
 namespace pinwell::test {

@@ -1,5 +1,5 @@
-// Fetches or downloads a URL and ends the process from the callback with status 7, whatever came of it; 3
-// when that was an error. The main thread only waits, and other threads live on until the very end.
+// Fetches or downloads a URL and ends the process from the callback: with status 7, whatever the result; with
+// status 3 after an error. The main thread only waits, and other threads live on until the very end.
 #include <cstdlib>
 #include <cstring>
 #include <memory>

@@ -1,4 +1,4 @@
-// The process may be ended by exit() in any callback, while the threads of all sessions live.
+// exit() may end the process in any callback, while the threads of all sessions live.
 #include <fcntl.h>
 #include <spawn.h>
 #include <sys/wait.h>
@@ -19,7 +19,7 @@ struct ProbeResult {
 
 class ExitFromACallback : public SessionTest {
   protected:
-    // Everything the sanitizers have to say about the end of the process is among the errors.
+    // All reports of the sanitizers about the end of the process are in `errors`.
     ProbeResult run(std::string mode) {
         const std::string errorFile = directory / "errors";
         const std::string temporary = directory / "tmp";

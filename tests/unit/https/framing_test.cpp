@@ -1,4 +1,4 @@
-// How an answer tells where it ends, and answers that tell it in two ways, or in none that is known.
+// The end of a response: stated in one known way, in two ways, or in an unknown one.
 #include "session_fixture.h"
 
 namespace pinwell::test {
@@ -8,14 +8,13 @@ using https::URLErrorCode;
 
 class Framing : public SessionTest {
   protected:
-    /// A whole answer of these fields, and an orderly end.
+    /// A whole response with these fields, and an orderly end.
     Outcome fetchAnswer(const std::string& fields, const std::string& body,
                         const std::string& version = "HTTP/1.1") {
         return fetchFrom(
             Script().readRequest().send(version + " 200 OK\r\n" + fields + "\r\n" + body).close());
     }
-    /// It failed in one of these ways. Releases of the transfer library differ in what they look at
-    /// themselves.
+    /// The outcome is one of these failures. Releases of the transfer library differ in their own checks.
     static void expectRefused(const Outcome& outcome, const std::string& what) {
         EXPECT_FALSE(outcome.body) << what;
         ASSERT_TRUE(outcome.error) << what;
@@ -54,7 +53,7 @@ TEST_F(Framing, ABrokenContentLengthIsNoWayToPassOffACutBody) {
         "cut");
 }
 
-// To one reader a length and to another an unknown field, it would make a cut body a whole one.
+// One reader would see a length, and another an unknown field: a cut body would seem complete.
 TEST_F(Framing, ASpaceBeforeTheColonIsRefused) {
     for (const char* field :
          {"Content-Length : 9\r\n", "Content-Length\t: 9\r\n", "Transfer-Encoding : chunked\r\n"})
@@ -80,7 +79,7 @@ TEST_F(Framing, AFoldedFieldOfAnotherNameIsUnfolded) {
     EXPECT_EQ(outcome.response->header("X-A"), "b c");
 }
 
-// RFC 9112, section 6.3: the coding goes before the length.
+// RFC 9112, section 6.3: the coding takes precedence over the length.
 TEST_F(Framing, ChunksGoBeforeAContentLength) {
     EXPECT_EQ(
         fetchAnswer("Content-Length: 1\r\nTransfer-Encoding: chunked\r\n", "4\r\nbody\r\n0\r\n\r\n").text(),
@@ -95,7 +94,7 @@ std::string gzipOfBody() {
     return "\x1f\x8b\x08\0\0\0\0\0\0\x03\x4b\xca\x4f\xa9\x04\0\xb2\x0b\xa8\xdb\x04\0\0\0"s;
 }
 
-// A compressed transfer was not asked for; unpacked, a few bytes could become very many.
+// A compressed transfer was not requested; unpacked, a few bytes could become very many.
 TEST_F(Framing, TransferCodingsOtherThanChunkedAreRefused) {
     for (const char* coding : {"gzip, chunked", "chunked, gzip", "deflate", "identity", "br", "x-gzip",
                                "chunked, chunked", "xchunked", "chunked;q=1", ""})

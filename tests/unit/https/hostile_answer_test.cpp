@@ -9,7 +9,7 @@ using ::testing::HasSubstr;
 
 class HostileAnswer : public SessionTest {
   protected:
-    // Runs until the script has got to the gate, then lets time pass.
+    // Runs until the script has reached the gate, then lets time pass.
     void expectTimeout(Script script) {
         server.enqueue(std::move(script));
         auto outcome = start(post(server.url(), "body"));
@@ -17,7 +17,7 @@ class HostileAnswer : public SessionTest {
         expectFailure(outlast(std::move(outcome)), URLErrorCode::timedOut, "no answer for 60 seconds");
     }
 
-    // For what different releases of the transfer library, or other timing, report under another code.
+    // For failures to which releases of the transfer library, or other timing, give different codes.
     static void expectFailureOf(const Outcome& outcome, std::initializer_list<URLErrorCode> codes) {
         ASSERT_TRUE(outcome.error);
         EXPECT_TRUE(std::any_of(codes.begin(), codes.end(), [&](URLErrorCode code) {
@@ -59,7 +59,7 @@ TEST_F(HostileAnswer, AProtocolThatWasNotOffered) {
 }
 
 TEST_F(HostileAnswer, ResetBeforeTheHandshake) {
-    // Where the client notices depends on how far it has got.
+    // The client's progress determines where it notices the reset.
     expectFailureOf(fetchFrom(Script().reset()),
                     {URLErrorCode::cannotConnect, URLErrorCode::secureConnectionFailed});
 }
@@ -105,8 +105,8 @@ TEST_F(HostileAnswer, ClosedWithinAChunk) {
                   URLErrorCode::connectionLost, "the connection was");
 }
 
-// A body that ends with the connection is complete only if the server said so: whoever sits between could cut
-// it.
+// A body that ends with the connection is complete only if the server said so: an attacker in between could
+// cut it.
 TEST_F(HostileAnswer, CutWithinABodyThatEndsWithTheConnection) {
     expectFailure(fetchFrom(Script().readRequest().send("HTTP/1.0 200 OK\r\n\r\nhalf").cut()),
                   URLErrorCode::connectionLost, "was cut within the answer");
@@ -199,7 +199,7 @@ TEST_F(HostileAnswer, AnEndlessHeaderLine) {
         URLErrorCode::tooLarge, "larger than");
 }
 
-// The transfer library has a limit of its own for a line, which is larger.
+// The transfer library has its own, larger limit for a line.
 TEST_F(HostileAnswer, AnEndlessHeaderLineUnderOurOwnLimit) {
     options.maximumSilentBytes = 10000;
     expectFailure(fetchFrom(Script()

@@ -1,4 +1,4 @@
-// A session that keeps its connection: when the next exchange goes over it, and when it does not.
+// A session that keeps its connection: exchanges that use it again, and exchanges that do not.
 #include <algorithm>
 
 #include "session_fixture.h"
@@ -10,7 +10,7 @@ using https::URLErrorCode;
 using ::testing::ElementsAre;
 using ::testing::SizeIs;
 
-/// An answer after which the connection stays open.
+/// A response after which the connection stays open.
 Response staying(std::string body) {
     return {.headers = {{"Connection", "keep-alive"}}, .body = std::move(body)};
 }
@@ -61,7 +61,7 @@ TEST_F(KeptConnection, EndsWithAServerThatClosesIt) {
     EXPECT_EQ(judgements(), 2U);
 }
 
-// The end may come before the next request, or be found by it.
+// The end may come before the next request, or the request may find it.
 TEST_F(KeptConnection, EndsWithAServerThatClosesItWithoutSayingSoBefore) {
     for (Script& (Script::*const end)() : {&Script::close, &Script::cut, &Script::reset}) {
         const Gate isOver;
@@ -180,7 +180,7 @@ TEST_F(KeptConnection, LimitsHoldForEachExchange) {
     EXPECT_THAT(server.connections(), SizeIs(1));
 }
 
-// HTTP/2, whose frames are made by hand (RFC 9113).
+// HTTP/2, with frames made by hand (RFC 9113).
 
 std::string frame(unsigned char type, unsigned char flags, unsigned char stream, const std::string& payload) {
     std::string bytes;

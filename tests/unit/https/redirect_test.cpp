@@ -1,4 +1,4 @@
-// Which redirects are followed, and with what request.
+// The redirects that are followed, and the next request.
 #include "https/redirect.h"
 
 #include "session_fixture.h"

@@ -1,5 +1,5 @@
-// The head of a response, line by line: what is taken, and what is refused whatever the transfer library
-// makes of it.
+// The head of a response, line by line: accepted lines, and lines that are refused even if the transfer
+// library accepts them.
 #include "https/response_head.h"
 
 #include <gtest/gtest.h>
@@ -18,7 +18,7 @@ class ResponseHead : public ::testing::Test {
   protected:
     https::ResponseHead head{100, 3};
 
-    /// What became of the last line; the ones before it are taken.
+    /// The result of the last line; the lines before it are accepted.
     Line add(std::initializer_list<std::string_view> lines) {
         Line last = Line::taken;
         for (const std::string_view line : lines) {

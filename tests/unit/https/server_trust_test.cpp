@@ -1,4 +1,4 @@
-// Who decides about a server, and on what.
+// The decision about a server, and its basis.
 #include <cstdlib>
 #include <filesystem>
 
@@ -172,8 +172,8 @@ TEST_F(ServerTrustChallenge, SendsTheHostNameInTheHandshake) {
     EXPECT_EQ(server.connections().at(0).serverName, "localhost");
 }
 
-// The transfer library reads SSLKEYLOGFILE once a process, so this test means most when it runs alone, as it
-// does under ctest.
+// The transfer library reads SSLKEYLOGFILE once in a process, so this test is most useful alone, as under
+// ctest.
 TEST_F(ServerTrustChallenge, WritesNoSessionKeysOutWhateverTheEnvironmentSays) {
     const std::string keys = directory / "keys";
     ::setenv("SSLKEYLOGFILE", keys.c_str(), 1);

@@ -84,7 +84,7 @@ Outcome SessionTest::fetchFrom(Script script) {
 }
 
 Outcome SessionTest::outlast(std::future<Outcome> outcome) {
-    // Again and again, since bytes that are still on their way count as an answer.
+    // Repeatedly, because bytes in transit reset the time.
     while (outcome.wait_for(options.pollInterval) != std::future_status::ready)
         clock.advance(static_cast<int>(https::kIdleTimeoutSeconds));
     return outcome.get();

@@ -18,7 +18,7 @@
 
 namespace pinwell::test {
 
-/// Time that stands still until the test moves it.
+/// A clock that only the test advances.
 class ManualClock {
   public:
     https::Clock::time_point now() const { return https::Clock::time_point(std::chrono::seconds(seconds_)); }
@@ -28,7 +28,7 @@ class ManualClock {
     std::atomic<int> seconds_ = 0;
 };
 
-/// Accepts every server unless told otherwise. Read its records only when the task has ended.
+/// Accepts every server by default. Read its records only after the task has ended.
 class RecordingDelegate : public https::SessionDelegate {
   public:
     using Challenge = https::AuthenticationChallenge;
@@ -66,7 +66,7 @@ class RecordingDelegate : public https::SessionDelegate {
     }
 };
 
-/// What a task came to.
+/// The outcome of a task.
 struct Outcome {
     std::optional<foundation::Data> body;
     std::optional<https::HTTPResponse> response;
@@ -79,7 +79,7 @@ struct Outcome {
 https::Request get(const std::string& url);
 https::Request post(const std::string& url, std::string_view body);
 
-/// That it failed so, and that the text is one line that holds these words.
+/// Expects this failure, with a text of one line that contains these words.
 void expectFailure(const Outcome& outcome, https::URLErrorCode code, std::string_view words);
 
 class SessionTest : public ::testing::Test {

@@ -1,4 +1,4 @@
-// Damaged tickets and damaged places: what is wrong is said, and the rest is shown.
+// Damaged tickets and damaged places: the fault is reported, and the rest is shown.
 #include "inspect/gather_ticket.h"
 #include "inspect_fixture.h"
 #include "src/DownloadDelegate.h"

@@ -1,4 +1,4 @@
-// What is found out about artefacts of every kind whose tickets are whole.
+// The findings about artefacts of every kind with intact tickets.
 #include <cerrno>
 
 #include "foundation/bytes.h"

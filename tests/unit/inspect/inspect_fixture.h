@@ -1,4 +1,4 @@
-// A platform of real services, but for the network, that trusts the tickets which the test makes.
+// A platform of real services, except the network. It trusts the test's tickets.
 #pragma once
 
 #include <gmock/gmock.h>
@@ -31,7 +31,7 @@ class InspectTest : public testing::Test {
     Data ticketFor(const Artefact& artefact) const { return sealed(artefact.payload()); }
 
     std::string write(const std::string& name, std::string_view contents) const;
-    /// Writes the artefact with that ticket stapled to it, and answers its path.
+    /// Writes the artefact with that ticket stapled to it, and returns its path.
     std::string stapled(const Artefact& artefact, const Data& ticket) const;
 
     /// A bundle of one signed executable, whose hash is `bundleHash`; stapled unless the ticket is empty.

@@ -1,4 +1,4 @@
-// The page for people: what is on it, and what never is.
+// The page for people: its contents, and forbidden contents.
 #include "inspect/render_text.h"
 
 #include <algorithm>

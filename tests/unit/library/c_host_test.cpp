@@ -1,4 +1,4 @@
-// The C interface as a guest: in several threads at once, and leaving the host process as it was.
+// The C interface as a guest: used by several threads at once, without effects on the host process.
 #include <dlfcn.h>
 #include <pthread.h>
 #include <sys/mman.h>
@@ -61,7 +61,7 @@ TEST(CHost, FreesAHandleOnceHoweverManyThreadsFreeIt) {
         std::vector<std::thread> running;
         for (int i = 0; i < 4; ++i) {
             running.emplace_back([&] {
-                // Whoever comes too late is told so.
+                // A late call gets an error.
                 static_cast<void>(pinwell_result_verdict(result));
                 if (pinwell_result_free(result) == PINWELL_OK) ++freed;
             });

@@ -1,4 +1,4 @@
-// What the C interface makes of arguments that are wrong, and of handles that are none.
+// The C interface with wrong arguments, and with invalid handles.
 #include <gmock/gmock.h>
 #include <sys/stat.h>
 
@@ -215,7 +215,7 @@ TEST_F(CInterface, RecognisesAHandleThatWasFreed) {
     ASSERT_EQ(judge(kSample.c_str(), kSample.size()), PINWELL_OK);
     pinwell_result* const freed = result;
     EXPECT_EQ(pinwell_result_free(freed), PINWELL_OK);
-    // Its memory may have another owner by now, its number has not.
+    // Its memory may belong to another handle now; its number does not.
     ASSERT_EQ(judge(kSample.c_str(), kSample.size()), PINWELL_OK);
     EXPECT_NE(result, freed);
     EXPECT_EQ(pinwell_result_verdict(freed), PINWELL_VERDICT_NONE);

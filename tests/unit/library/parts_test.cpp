@@ -13,7 +13,7 @@ namespace {
 
 TEST(ErrorMessage, IsCutBetweenCharactersAndEndsWithAZero) {
     pinwell_error error = PINWELL_ERROR_INIT;
-    // Characters of two bytes, behind one byte and behind none: one of the two ends in the middle of one.
+    // Characters of two bytes, after one byte and after none: one of the two texts is cut inside a character.
     for (const char* const start : {"", "a"}) {
         std::string message = start;
         for (int i = 0; i < 300; ++i) message += "\xc3\xa9";

@@ -1,4 +1,4 @@
-// Tickets judged through the public interface, and held against what the tool itself says of them.
+// Tickets judged through the public interface, compared with the tool's own verdicts.
 #include <gtest/gtest.h>
 #include <pinwell/ticket.h>
 

@@ -1,4 +1,4 @@
-// One artefact before and after its lookup: what is read, written and said, and what tells it later.
+// One artefact before and after its lookup: reads, writes and messages, and its later recognition.
 #include "retrieval/artefact_run.h"
 
 #include <gmock/gmock.h>
@@ -34,7 +34,7 @@ auto Ended(int exitStatus, Cause cause) {
     return Optional(AllOf(Field(&Outcome::exitStatus, exitStatus), Field(&Outcome::cause, cause)));
 }
 
-/// A bundle with a hash of its own.
+/// A bundle with its own hash.
 class Artefacts : public testing::Test {
   protected:
     Artefacts() {
@@ -46,7 +46,7 @@ class Artefacts : public testing::Test {
         return std::filesystem::exists(carrier) ? readFile(carrier) : std::string("none");
     }
     void staple(const foundation::Data& bytes) const { writeFile(carrier, foundation::ByteView(bytes)); }
-    /// As the record service answers.
+    /// A response of the record service.
     static Answer answered(const std::string& record) {
         Answer answer;
         answer.kind = Answer::Kind::answered;
@@ -193,7 +193,7 @@ TEST_F(Artefacts, AValidationGoesByTheServicesTicketToo) {
     EXPECT_EQ(stapled(), foundation::toString(ticket));
 }
 
-// Tickets at hand.
+// Tickets that exist already.
 
 TEST_F(Artefacts, AttachingTakesTheTicketOfTheRecord) {
     std::string asked;
@@ -219,7 +219,7 @@ TEST_F(Artefacts, AttachingTellsATicketThatIsNotThereFromOneThatCannotBeRead) {
     EXPECT_EQ(stapled(), "none");
 }
 
-// What tells the files later.
+// Recognising the files later.
 
 TEST_F(Artefacts, TheStateOfTheFilesIsAsAStapleLeftThem) {
     ArtefactRun run = made(kOperationStaple);
@@ -246,7 +246,7 @@ TEST_F(Artefacts, TheStateOfTheFilesShowsEveryChangeOfExecutableAndTicket) {
     for (const std::string& file : {executable, carrier}) {
         const std::string then = state();
         waitForAnotherTimeThan(file);
-        // The same bytes, written anew with the old time: who could say that they are the same?
+        // The same bytes, written again with the old time: nothing proves that they are the same.
         const auto time = std::filesystem::last_write_time(file);
         writeFile(file, readFile(file));
         std::filesystem::last_write_time(file, time);

@@ -1,4 +1,4 @@
-// Lookups of many names, with a service that answers as it likes.
+// Lookups of many names, with a service that responds in any way.
 #include "retrieval/record_service.h"
 
 #include <gmock/gmock.h>
@@ -53,7 +53,7 @@ testing::Matcher<const Answer&> Tells(const std::string& name) {
                      R"({"records":[)" + recordOf(name) + "]}"));
 }
 
-/// A service that knows every record, until the test says otherwise.
+/// A service that by default knows every record.
 class Lookup : public testing::Test {
   protected:
     std::vector<Answer> lookUp(const Names& names, std::optional<Clock::time_point> deadline = std::nullopt) {
@@ -257,7 +257,7 @@ TEST_F(Lookup, ANameThatIsNotUTF8IsNoRecords) {
 
 class LookupOfAnAsset : public Lookup {
   protected:
-    /// A record that names an asset, whose fetch is answered so.
+    /// A record that names an asset, with this response to its download.
     void serveAsset(const Reply& asset) {
         sessions.answerBy([asset](const https::Request& request) {
             return request.method == "POST"

@@ -1,4 +1,4 @@
-// What is said of an artefact.
+// The report on an artefact.
 #include "retrieval/report.h"
 
 #include <gmock/gmock.h>

@@ -1,4 +1,4 @@
-// How long not to ask.
+// The delay before a retry.
 #include "retrieval/retry_policy.h"
 
 #include <gtest/gtest.h>

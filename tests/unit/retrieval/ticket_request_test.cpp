@@ -1,4 +1,4 @@
-// Requests for tickets, with a service that answers as it likes.
+// Requests for tickets, with a service that responds in any way.
 #include "retrieval/ticket_request.h"
 
 #include <gmock/gmock.h>
@@ -43,7 +43,7 @@ std::string quoted(const std::string& text) {
     return "\"" + text + "\"";
 }
 
-/// A service that issues what it is asked for, until the test says otherwise.
+/// A service that by default issues every requested ticket.
 class Request : public testing::Test {
   protected:
     Request() { retry = {.retries = 3, .firstDelay = std::chrono::duration<double>(0)}; }
@@ -51,7 +51,7 @@ class Request : public testing::Test {
     static TicketWish wishFor(unsigned value) { return {.hashes = {{2, hashOf(value)}}, .label = "App"}; }
     static std::string nameOf(unsigned value) { return "2/2/" + foundation::toHex(hashOf(value)); }
 
-    /// The members of a good answer, by which each may be changed.
+    /// The members of a valid response, each changeable by name.
     static std::map<std::string, std::string> issued(unsigned value, const Data& ticket) {
         return {{"record", quoted(nameOf(value))},
                 {"label", quoted("App")},
@@ -99,7 +99,7 @@ class Request : public testing::Test {
     Cancellation cancellation;
 };
 
-// What is asked.
+// The request.
 
 TEST_F(Request, SaysWhatTheTicketIsToListAndWhatItIsFor) {
     TicketWish wish = wishFor(1);
@@ -153,7 +153,7 @@ TEST_F(Request, HasAKeyThatNoOtherOneHasAndEachTryHas) {
     }
 }
 
-// What comes back.
+// The response.
 
 TEST_F(Request, EndsWithTheTicketThatWasIssued) {
     for (const auto& [action, status] :
@@ -423,7 +423,7 @@ TEST_F(Request, EndsWhenItIsCancelled) {
     EXPECT_EQ(requests().end(), Cause::interrupted);
 }
 
-// Where.
+// The URL.
 
 TEST(ServiceURL, IsHTTPSWithAHostAndMaybeAPath) {
     const auto text = [](std::string_view given) {

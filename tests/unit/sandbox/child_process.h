@@ -1,4 +1,4 @@
-// A child process for what cannot be undone: rights that are given up, limits that are set.
+// A child process for irreversible actions: giving up rights, setting limits.
 #pragma once
 
 #include <functional>
@@ -8,10 +8,10 @@ namespace pinwell::test {
 
 struct ChildEnd {
     int status = 0;    // as waitpid(2) has it
-    std::string said;  // what the child wrote to its output
+    std::string said;  // the child's output
 };
 
-/// Runs `body` in a child, whose exit status is what it returns.
+/// Runs `body` in a child; its result is the exit status.
 ChildEnd endOfChild(const std::function<int(int output)>& body);
 
 }  // namespace pinwell::test

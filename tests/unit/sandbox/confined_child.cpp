@@ -15,14 +15,14 @@ namespace {
 
 constexpr int kUnconfined = 250;
 
-// The child's exit status, and what it wrote.
+// The child's exit status and output.
 Outcome inChild(const std::function<int(int output)>& body) {
     const ChildEnd end = endOfChild(body);
     if (!WIFEXITED(end.status)) ADD_FAILURE() << "the child was ended by signal " << WTERMSIG(end.status);
     return {end.said, WEXITSTATUS(end.status)};
 }
 
-// A failed write shows as what is missing from the output.
+// A failed write is visible as missing output.
 void say(int output, const std::vector<std::string>& lines) {
     for (const std::string& line : lines)
         [[maybe_unused]] const ssize_t written = write(output, (line + "\n").data(), line.size() + 1);

@@ -1,5 +1,5 @@
-// A child process that gives up rights and then tries something: confinement cannot be lifted, so no test may
-// confine the test program itself.
+// A child process that gives up rights and then attempts an action. Confinement is irreversible, so no test
+// may confine the test program itself.
 #pragma once
 
 #include <functional>
@@ -10,7 +10,7 @@
 
 namespace pinwell::test {
 
-/// What is tried. Returns 0, or the errno value of what failed; at most 200.
+/// The attempted action. Returns 0, or the errno value of the failure; at most 200.
 using Attempt = std::function<int()>;
 
 /// The result of `attempt` in a child that is confined first. Fails the test when the child dies or when a
@@ -21,7 +21,7 @@ int whenConfined(const sandbox::Confinement& confinement, const Attempt& attempt
 enum class Missing { landlock, seccomp };
 
 struct Outcome {
-    std::string said;  // what confine() returned, a line each
+    std::string said;  // the result of confine(), a line each
     int result = 0;    // of the attempt
 };
 Outcome whenConfinedWithout(Missing missing, const sandbox::Confinement& confinement, const Attempt& attempt);

@@ -135,7 +135,7 @@ TEST_F(ConfinedFiles, StayOpenWhenTheyWereOpenBefore) {
     close(before);
 }
 
-/// A call that nobody may make any more. Its arguments do no harm where it may be made.
+/// A forbidden call. Its arguments do no harm if it is allowed.
 struct ForbiddenCall {
     const char* name;
     Attempt attempt;
@@ -244,7 +244,7 @@ TEST_F(ConfinedReader, ChangesNothingOfAFile) {
     if (kReaderWritesCounts) GTEST_SKIP() << "this build writes down what runs";
     if (kSanitized) GTEST_SKIP() << "a sanitizer removes files of its own";
     const std::string file = given("file");
-    // Even where a rule would let it.
+    // Even if a rule would allow it.
     Confinement confinement = writing();
     confinement.calls = Calls::reading;
     const auto refused = testing::AnyOf(EPERM, ENOSYS);
@@ -289,7 +289,7 @@ TEST_F(ConfinedReader, StillHasThreadsAndMemory) {
 using ConfinedService = Confined;
 
 #ifdef SYS_socketcall
-constexpr bool kOneCallForSockets = true;  // whose arguments no filter sees
+constexpr bool kOneCallForSockets = true;  // no filter sees its arguments
 #else
 constexpr bool kOneCallForSockets = false;
 #endif
@@ -319,7 +319,7 @@ TEST_F(ConfinedService, WithoutANetworkHasSocketsOfTheFileSystemAlone) {
 class OpenSocket {
   public:
     int bindIt() const { return with(0, ::bind); }
-    int connectIt() const { return with(1, ::connect); }  // to a port where nobody listens
+    int connectIt() const { return with(1, ::connect); }  // to a port without a listener
 
   private:
     int with(in_port_t port, int (*call)(int, const sockaddr*, socklen_t)) const {
@@ -406,7 +406,7 @@ TEST(CoreDumps, AreForbiddenForGood) {
         sandbox::forbidCoreDumps();
         rlimit limit{};
         getrlimit(RLIMIT_CORE, &limit);
-        // A sanitizer reads the memory of its own process, which only one that may be dumped allows.
+        // A sanitizer reads the memory of its own process, which must be dumpable for this.
         const bool isDumpable = prctl(PR_GET_DUMPABLE, 0, 0, 0, 0) != 0;
         _exit(limit.rlim_max == 0 && isDumpable == kSanitized ? 0 : 1);
     }

@@ -71,7 +71,7 @@ TEST(NeededFiles, HoldTheTypeDatabasesOfTheUser) {
 TEST(NeededFiles, HoldTheLoadersOwnDirectories) {
     const auto paths = pathsOf(sandbox::libraryFiles());
     EXPECT_THAT(paths, testing::Contains("/usr/lib"));
-    // Those that the loader names itself come after ours.
+    // The loader's own directories come after ours.
     EXPECT_GT(std::count(paths.begin(), paths.end(), "/usr/lib"), 1);
 }
 

@@ -1,4 +1,4 @@
-// How a process ends that runs away. Each is a child: what limits it cannot be lifted.
+// The end of a process that runs away. Each is a child, because its limits cannot be lifted.
 #include "sandbox/runaway.h"
 
 #include <gmock/gmock.h>
@@ -25,7 +25,7 @@ namespace {
 
 const std::atomic<std::int32_t> kStatus{65};
 
-// What a child does under a limit of one second, and how it ends.
+// Runs a child under a limit of one second, and returns its end.
 ChildEnd endOf(const std::function<void(int output)>& body) {
     return endOfChild([&](int output) {
         const rlimit none{0, 0};
@@ -42,7 +42,7 @@ void useProcessorTime(rlim_t seconds) {
     while (static_cast<rlim_t>(used.ru_utime.tv_sec + used.ru_stime.tv_sec) < seconds);
 }
 
-// Deeper than any stack. Through a pointer that may change, or the compiler would make it a loop.
+// Deeper than any stack. It goes through a variable pointer; otherwise the compiler would make it a loop.
 int fall(int depth);
 int (*volatile further)(int) = fall;
 
@@ -53,7 +53,7 @@ int fall(int depth) {
 }
 
 #ifdef __SANITIZE_THREAD__
-constexpr bool kSignalsWait = true;  // until the program calls what the sanitizer knows to wait
+constexpr bool kSignalsWait = true;  // until the program makes a call at which the sanitizer delivers them
 #else
 constexpr bool kSignalsWait = false;
 #endif

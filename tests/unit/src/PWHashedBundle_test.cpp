@@ -227,7 +227,7 @@ TEST_F(Bundle, DeletingThroughTheBaseRaisesSinceNoWriteHookIsOverridden) {
     EXPECT_EQ(test::readFile(ticketPath()), "OLD");
 }
 
-// A bundle whose directories lead, or are made to lead, into another one.
+// A bundle with directories that are, or become, links into another one.
 class LinkedBundle : public Bundle {
   protected:
     LinkedBundle() {
@@ -244,7 +244,7 @@ class LinkedBundle : public Bundle {
         std::filesystem::create_directory_symlink(target, contents());
     }
 
-    // Fails with the message of a ticket that is in the way, and leaves the other bundle as it was.
+    // Fails with the message about an existing ticket, and leaves the other bundle unchanged.
     void expectNothingIsWritten() {
         std::optional<Error> error;
         const MessageCapture output(kVerbosityVerbose);
@@ -262,7 +262,7 @@ class LinkedBundle : public Bundle {
     // A later object of the same path.
     PWHashedBundle again() { return {platform.directory.url("App.app"), platform.services()}; }
 
-    std::optional<PWHashedBundle> found;  // made when the bundle is there, which it holds
+    std::optional<PWHashedBundle> found;  // made after the bundle, which it keeps open
 };
 
 TEST_F(LinkedBundle, HasNoTicketBehindALinkThatLeadsOut) {
@@ -300,7 +300,7 @@ TEST_F(LinkedBundle, IsWrittenAsItWasFoundWhenAnotherTakesItsPlaceMeanwhile) {
     EXPECT_EQ(test::readFile(platform.directory / "Found.app/Contents/CodeResources"), "NEW TICKET");
     EXPECT_EQ(test::readFile(ticketPath()), "THE OTHER'S TICKET");
 
-    // Whoever reads it back while it is held reads what was written.
+    // A reader during its life sees the written ticket.
     EXPECT_EQ(again().ticketData(), foundation::toData(std::string_view("NEW TICKET")));
 }
 

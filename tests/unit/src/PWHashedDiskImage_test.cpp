@@ -117,7 +117,7 @@ TEST_F(DiskImage, WithASuperblobThatCountsNoBlobsIsSignedAndAccepted) {
     EXPECT_EQ(image.syntheticCDHash(), std::nullopt);
 }
 
-// Without a set of blobs there are none, which is what the superblob counts.
+// Without a set of blobs the number is zero, which is the superblob's count.
 TEST_F(DiskImage, WhoseSuperblobCountsNoBlobsButIsLongerIsAccepted) {
     const std::uint64_t length = 20;
     Data superblob = SuperBlobBuilder().length(length).build();
@@ -331,8 +331,7 @@ TEST_F(DiskImage, WhoseLastBlobHasNoRoomForItsHeaderIsRefusedThoughAllIsFilled) 
               "Total Length: 20 Found blobs: 0");
 }
 
-// A file that is a hole behind its data and in front of its trailer: it has as many bytes as its trailer
-// likes.
+// A file with a hole between its data and its trailer: it is as long as its trailer claims.
 class SparseDiskImage : public DiskImage {
   protected:
     void putSparse(std::uint64_t signatureLength, const Data& startOfSignature = {}) {
@@ -356,7 +355,7 @@ TEST_F(SparseDiskImage, WithASuperblobBeyond32BitsIsRefusedByItsHeaderAlone) {
     EXPECT_EQ(platform.files.count("handle.read"), 2U);
 }
 
-// What is an image's signature to the one is its signature to the other, however long it is.
+// The tool and the code-signing service find the same signature in an image, whatever its length.
 class LargeDiskImage : public SparseDiskImage {
   protected:
     std::optional<Data> hashOfTheSignature() {
@@ -370,7 +369,7 @@ class LargeDiskImage : public SparseDiskImage {
     std::unique_ptr<codesign::CodeSigningService> service = codesign::makeCodeSigningService();
 };
 
-// A ticket, of zeros, makes up for what is missing to the length.
+// A ticket of zeros fills up the length.
 TEST_F(LargeDiskImage, WithASuperblobOfFourGibibytesTakesMemoryForWhatIsThere) {
     constexpr std::uint32_t kLength = 0xFFFFFFFF;
     const auto others = static_cast<std::uint32_t>(DiskImageBuilder::signature().build().size());
@@ -385,7 +384,7 @@ TEST_F(LargeDiskImage, WithASuperblobOfFourGibibytesTakesMemoryForWhatIsThere) {
     EXPECT_LE(test::residentMemory(), before + test::kLittleMemory);
 }
 
-// None that long is ever accepted: of this one, so much is held as says that.
+// No ticket of this length is ever accepted: only enough of it is kept to show this.
 TEST_F(LargeDiskImage, HasTheBeginningOfATicketThatIsLongerThanAny) {
     constexpr std::uint32_t kLength = 200U * 1024 * 1024;
     const Data header = ByteWriter().be32(0xFADE0B01).be32(kLength - 20).data();
@@ -438,7 +437,7 @@ TEST_F(DiskImage, KnowsItsTicketByTheSlotWhateverTheMagicIs) {
 }
 
 TEST_F(DiskImage, HasNoTicketInABlobThatIsShorterThanItsHeader) {
-    // Two index entries overlap so that the first blob is 4 bytes long and says so.
+    // Two index entries overlap, so the first blob is 4 bytes long and has this length.
     const Data words = ByteWriter().be32(0xFADE0B01).be32(4).be32(8).data();
     put(DiskImageBuilder().superblob(SuperBlobBuilder().blob(0x10002, words).blob(5, {}).offsetOf(5, 32)));
     auto image = open();

@@ -1,4 +1,4 @@
-// Writing: a ticket's way into an image, and out of it.
+// Writing a ticket into an image, and removing it.
 #include <sys/stat.h>
 
 #include <algorithm>
@@ -36,7 +36,7 @@ SuperBlobBuilder signedAndStapled(std::string_view ticket) {
 
 class DiskImageWriting : public test::DiskImageTest {
   protected:
-    // One call of the hook on the image as `builder` makes it.
+    // One call of the hook on the image of `builder`.
     bool write(const DiskImageBuilder& builder, std::string_view ticket) {
         test::writeFile(directory / "new.ticket", ticket);
         return run(builder, source, false);
@@ -72,7 +72,7 @@ class DiskImageWriting : public test::DiskImageTest {
     }
 
     const URL source = directory.url("new.ticket");
-    std::optional<Error> error = Error::osStatus(1);  // what the caller had in it
+    std::optional<Error> error = Error::osStatus(1);  // the caller's earlier value
     Lines lines;
     std::int32_t exitCode = 0;
     Data header;
@@ -86,7 +86,7 @@ TEST_F(DiskImageWriting, AddsATicketToMoreBlobsThan16BitsCount) {
                 contentsOf(DiskImageBuilder().superblob(superblob.blob(0x10002, ticketBlob("TICKET")))));
 }
 
-// An image of 1000 bytes of data, this superblob with zeros behind it up to `length`, and the trailer.
+// An image of 1000 bytes of data, this superblob with zeros after it up to `length`, and the trailer.
 class LargeDiskImageWriting : public DiskImageWriting {
   protected:
     void putSparse(std::uint64_t length, const SuperBlobBuilder& superblob) {
@@ -112,7 +112,7 @@ TEST_F(LargeDiskImageWriting, AddsATicketToASuperblobOf200Mebibytes) {
     const std::size_t before = test::residentMemory();
     auto image = open();
     EXPECT_TRUE(image._writeNewTicketDataFromURL(source, url, false, &error));
-    // A sanitizer has memory of its own for what is read.
+    // A sanitizer needs its own memory for the bytes read.
     if (!foundation::kSanitized) {
         EXPECT_LE(test::residentMemory(), before + test::kLittleMemory);
     }
@@ -170,8 +170,8 @@ TEST_F(DiskImageWriting, AppendsTheTicketToASignedImagesBlobsWhichMoveBy8) {
     EXPECT_FALSE(printedTruncation());
 }
 
-// The superblob then stands at offset 0, which in a trailer means that there is none: the read-back of a
-// staple is what finds out.
+// The superblob is then at offset 0. In a trailer this means that there is none: the read-back of a staple
+// notices it.
 TEST_F(DiskImageWriting, OfATrailerAloneSucceedsThoughTheTicketIsNotFoundAgain) {
     ASSERT_TRUE(write(DiskImageBuilder().data({}), "TICKET"));
     EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().data({}).superblob(stapled("TICKET"))));
@@ -419,7 +419,7 @@ TEST_F(DiskImageWriting, MayBeCalledWithoutAPlaceForTheError) {
 class FailingDiskImageWriting : public DiskImageWriting, public testing::WithParamInterface<const char*> {
   protected:
     FailingDiskImageWriting() {
-        // Reading comes first and must work: seven operations, of which two are seeks.
+        // Reading comes first and must succeed: seven operations, two of them seeks.
         const std::string operation = GetParam();
         put(image);
         const auto before = platform.files.operations().size();
@@ -565,7 +565,7 @@ TEST_F(CodeSignedDiskImage, KeepsItsSignaturesHashAndValidityThroughEveryStaple)
     EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(DiskImageBuilder::signature())));
 }
 
-// The signature is not read from the ticket's slot, so it does not matter how many entries that has.
+// The signature is not read from the ticket's slot, so the number of entries in that slot does not matter.
 TEST_F(CodeSignedDiskImage, WithTwoTicketsKeepsItsSignaturesHashAndIsStapled) {
     put(DiskImageBuilder().superblob(signedAndStapled("ONE").blob(0x10002, ticketBlob("TWO"))));
     const Data hash = test::codeHashOf(2, DiskImageBuilder::codeDirectory());

@@ -110,7 +110,7 @@ TEST_F(Factory, ASymbolicLinkIsNotFollowed) {
     EXPECT_EQ(output.lines()[1], "Pinwell is incapable of working with alias files.");
 }
 
-// A kind whose hooks answer what the test says and count their calls.
+// A kind whose hooks return the test's values and count their calls.
 class ProbeFile : public PWHashedFile {
   public:
     using PWHashedFile::noteState;
@@ -347,13 +347,13 @@ TEST_F(SafeReplacement, ACopyThatCannotBeTrashedIsSilentAndNoError) {
     EXPECT_EQ(output.lines().size(), 2U);
 }
 
-// A file that was read before, so that a write goes by what it was then.
+// A file that was read before, so a write depends on its state at that time.
 class ChangedFile : public SafeReplacement {
   protected:
     ChangedFile() { file.noteState(); }
 
     static void changeOnce(const std::string& changed) {
-        // The clock of the file system may stand still between two changes; the length does not.
+        // The clock of the file system may not advance between two changes; the length does.
         test::writeFile(changed, std::string_view("CHANGED"));
     }
     void expectRefused() {
@@ -421,7 +421,7 @@ TEST_F(SafeReplacement, OfAFileWhoseStateCouldNotBeToldWhenItWasReadIsRefused) {
     EXPECT_EQ(test::readFile(path), "OLD");
 }
 
-// What interrupts a write, and what for: the whole process, as a terminal does it.
+// The signal that interrupts a write. It is sent to the whole process, as a terminal does.
 class InterruptedReplacement : public SafeReplacement, public testing::WithParamInterface<int> {
   protected:
     InterruptedReplacement() {

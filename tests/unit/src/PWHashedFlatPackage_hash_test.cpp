@@ -161,7 +161,7 @@ TEST_F(FlatPackageHash, OfAMissingFileIsNoneInSilence) {
     EXPECT_EQ(output.text(), "");
 }
 
-// What it signs would be any twenty bytes of the heap.
+// It would sign any twenty bytes of the heap.
 TEST_F(FlatPackageHash, OfASignedArchiveWithoutAChecksumAlgorithmIsNoneAndSaysNothing) {
     put(ArchiveBuilder()
             .digest("none")

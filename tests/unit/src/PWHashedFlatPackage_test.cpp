@@ -254,11 +254,11 @@ TEST_F(FlatPackage, WhoseSizeCannotBeHadHasNoTicketAndIsReadNoFurther) {
     EXPECT_EQ(platform.files.count("handle.read"), 0U);
 }
 
-// Data that a walk does not get with the record behind them.
+// Data so long that a walk does not read it together with its record.
 const std::string kLong(100'000, 'x');
 
 // Operation numbers of a walk: 0 notes the file's state, 1 opens, 2 seeks to the end, 3 and 4 seek to and
-// read the last record, 5 and 6 its data, where these are long.
+// read the last record, 5 and 6 its data, if these are long.
 constexpr std::size_t kRecordSeek = 3;
 constexpr std::size_t kRecordRead = 4;
 constexpr std::size_t kDataSeek = 5;
@@ -333,7 +333,7 @@ void putSparse(const std::string& path, std::uintmax_t size, const std::string& 
     EXPECT_EQ(std::fclose(file), 0);
 }
 
-// None that long is ever accepted: of this one, so much is held as says that.
+// No ticket of this length is ever accepted: only enough of it is kept to show this.
 TEST_F(FlatPackage, HasTheBeginningOfATicketThatIsLongerThanAny) {
     TrailerFields fields;
     fields.type = 2;

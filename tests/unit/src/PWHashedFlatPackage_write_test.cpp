@@ -32,7 +32,7 @@ class FlatPackageWriting : public test::FlatPackageTest {
     bool staple(ErrorOut error = nullptr) { return package.writeNewTicketDataFromURL(source, error); }
     bool unstaple(ErrorOut error = nullptr) { return package._deleteExistingTicket(error); }
 
-    /// The hook alone, in place: it hands out what the driver keeps to itself.
+    /// Only the hook, in place: it returns the error that the driver keeps.
     bool write(std::optional<Error>& error) {
         return package._writeNewTicketDataFromURL(source, url, false, &error);
     }
@@ -143,7 +143,7 @@ TEST_F(FlatPackageWriting, AChainOfUnknownTrailersAloneIsWrittenFromOffset0AsWel
     EXPECT_EQ(contents(), PackageBuilder().archive({}).unknown("one").ticket("NEW TICKET").build());
 }
 
-// A ticket at offset 0, with no terminator met, looks like no chain at all: a new one is begun behind it.
+// A ticket at offset 0, without a terminator, does not look like a chain: a new chain begins after it.
 TEST_F(FlatPackageWriting, ATicketAtTheStartOfTheFileStaysAndAChainIsBegunBehindIt) {
     const PackageBuilder ticketAlone = PackageBuilder().archive({}).ticket("OLD");
     put(ticketAlone);
@@ -161,7 +161,7 @@ TEST_F(FlatPackageWriting, DeletingATicketAtTheStartOfTheFileEndsTheChainBehindI
     EXPECT_EQ(fresh.ticketData(), std::nullopt);
 }
 
-// Its place is kept, so that the next ticket takes it.
+// Its place is kept, and the next ticket takes it.
 TEST_F(FlatPackageWriting, ATicketRecordWithoutDataIsReplaced) {
     put(PackageBuilder().terminator().ticket(""));
     EXPECT_TRUE(staple());
@@ -284,7 +284,7 @@ TEST_F(FlatPackageWriting, AFirstStapleThatFailsAtAnyOperationEndsWith73OrSuccee
         put(PackageBuilder());
         PWHashedFlatPackage file{url, platform.services()};
         file.ticketData();
-        const std::size_t opened = platform.files.operations().size() + 2;  // behind the read of the ticket
+        const std::size_t opened = platform.files.operations().size() + 2;  // after the read of the ticket
         platform.files.failOperation(opened + n, EIO);
         std::string lastLine;
         {
@@ -302,8 +302,8 @@ TEST_F(FlatPackageWriting, AFirstStapleThatFailsAtAnyOperationEndsWith73OrSuccee
     }
 }
 
-// A chain that has trailers but no ticket is written over from the file's first byte on. Whatever operation
-// is the last one to work, what is left behind must not look like one.
+// A chain with trailers but without a ticket is overwritten from the file's first byte on. Whatever operation
+// is the last to succeed, the remaining file must not look like such a chain.
 TEST_F(FlatPackageWriting, CutShortAnywhereLeavesAFileThatCanBeStapledAgain) {
     const PackageBuilder unstapled;
     const PackageBuilder followed = PackageBuilder().terminator().ticket("AN OLD TICKET").unknown("unknown");
@@ -317,7 +317,7 @@ TEST_F(FlatPackageWriting, CutShortAnywhereLeavesAFileThatCanBeStapledAgain) {
             failing.files.answerTemporaryDirectory(foundation::URL::fileURLWithPath(temporary.path()));
             PWHashedFlatPackage file{url, failing.services()};
             file.ticketData();
-            // Behind the question of cloning and the read of the ticket.
+            // After the check for cloning and the read of the ticket.
             const std::size_t opened = failing.files.operations().size() + 4;
             for (std::size_t i = n; i < 20; ++i) failing.files.failOperation(opened + i, EIO);
             const MessageCapture output(kVerbosityQuiet);

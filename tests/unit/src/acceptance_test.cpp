@@ -237,7 +237,7 @@ TEST_F(Acceptance, AFailedStapleLeavesTheWritersCodeAndHandsOutItsError) {
     EXPECT_FALSE(error.has_value());  // the refusal to replace it has no error object
 }
 
-// A kind whose write answers what the test says, and never sets a code.
+// A kind whose write returns the test's value, and never sets a code.
 struct SilentFile : PWHashedBundle {
     using PWHashedBundle::PWHashedBundle;
     bool writeNewTicketDataFromURL(const URL& source, ErrorOut error) override {

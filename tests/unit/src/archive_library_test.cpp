@@ -1,6 +1,5 @@
-// What a package asks of the archive library, and what it makes of every answer. The library is this file:
-// its functions, defined here, take the place of the real ones, so that they can answer what no archive makes
-// those say.
+// A package's calls to the archive library, and its reaction to every result. The library is this file: its
+// functions replace the real ones, so they can return results that no real archive causes.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <xar/xar.h>
@@ -28,10 +27,10 @@ struct Signature {
 
 struct Property {
     std::int32_t status = 0;
-    std::optional<std::string> text;  // nothing for null
+    std::optional<std::string> text;  // `nullopt` for null
 };
 
-/// The one archive there is, and what was asked of it.
+/// The only archive, and the calls for it.
 struct Library {
     bool opens = true;
     std::vector<Signature> signatures;
@@ -39,7 +38,7 @@ struct Library {
 
     std::vector<std::string> opened;
     std::vector<std::int32_t> modes;
-    std::vector<std::string> copied;  // types of the signatures whose data were asked for
+    std::vector<std::string> copied;  // types of the signatures whose data were copied
     std::vector<std::string> keys;
     bool wantedMoreThanTheData = false;
     int closed = 0;
@@ -64,7 +63,7 @@ class ArchiveLibrary : public FlatPackageTest {
         library.signatures = {{"CMS", 0, Data(20, std::byte{0xC5})}};
     }
 
-    /// The hash of a package that nobody has asked before, and what was said.
+    /// The hash of a new package object, and the messages.
     std::optional<Data> hash() {
         PWHashedFlatPackage fresh{url, platform.services()};
         const MessageCapture output(kVerbosityVerbose);
@@ -179,7 +178,7 @@ uint8_t xar_signature_copy_signed_data(xar_signature_t sig, uint8_t** data, uint
     library.copied.push_back(signature.type);
     library.wantedMoreThanTheData |=
         signed_data != nullptr || signed_length != nullptr || signed_offset != nullptr;
-    // A failure may leave its half of the work behind, which is the caller's then.
+    // A failed call may leave a part of its results, which the caller then owns.
     *length = static_cast<uint32_t>(signature.signedData.size());
     *data = static_cast<uint8_t*>(std::malloc(signature.signedData.size() + 1));
     for (std::size_t i = 0; i < signature.signedData.size(); ++i)

@@ -179,7 +179,7 @@ TEST(BlobSet, RefusesTwoEqualEntriesFarApart) {
 
 class SuperblobWithTicket : public testing::Test {
   protected:
-    // What `superblob`, of `count` blobs, becomes.
+    // The result of rewriting `superblob`, which has `count` blobs.
     Data rewritten(const Data& superblob, std::uint32_t count, std::string_view ticket) {
         const auto blobs = orderedBlobSetForSuperBlob(superblob, count);
         EXPECT_TRUE(blobs.has_value());
@@ -248,7 +248,7 @@ TEST_F(SuperblobWithTicket, HasRoomBehindItForWhatTheCallerPutsThere) {
     EXPECT_EQ(toData(superblobWithTicket(*blobs, foundation::asBytes("ticket"), 512).view()), expected);
 }
 
-// Views of zeros that nobody reads.
+// Views of zeros that are never read.
 TEST_F(SuperblobWithTicket, IsNotMadeWhereItsLengthDoesNotFitIn32Bits) {
     const foundation::SparseBuffer zeros(0xFFFFFFFF);
     const auto blobOf = [&](std::uint64_t length) {

@@ -1,5 +1,5 @@
-// An image in a directory of the test's own, on a platform whose code-signing service is a fake that takes
-// every image for unsigned and knows one synthetic cdhash.
+// An image in a temporary directory, on a platform with a fake code-signing service. The service treats every
+// image as unsigned and has one synthetic cdhash.
 #pragma once
 
 #include <gtest/gtest.h>
@@ -33,7 +33,7 @@ class DiskImageTest : public testing::Test {
     void put(const DiskImageBuilder& builder) { writeFile(path, foundation::ByteView(builder.build())); }
     PWHashedDiskImage open() { return {url, platform.services()}; }
 
-    /// The image's bytes as they are now.
+    /// The image's present bytes.
     std::string contents() const { return readFile(path); }
     static std::string contentsOf(const DiskImageBuilder& builder) {
         return foundation::toString(builder.build());

@@ -59,7 +59,7 @@ TEST_F(FileKind, AGenericPackageIsABundleByItsExtensionAlone) {
     EXPECT_EQ(classOf("com.ostrel.package", "rtfd"), AssessmentClass::unknown);
 }
 
-/// Its only type conforms to all that the test says, which no type of the platform does.
+/// Its only type conforms to all types of the test, which no type of the platform does.
 class ManifoldType final : public types::TypeService {
   public:
     explicit ManifoldType(std::set<std::string_view> all) : all_(std::move(all)) {}

@@ -1,4 +1,4 @@
-// Tickets that are fetched as an asset of their own.
+// Tickets that are fetched as a separate asset.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/file.h>
@@ -37,7 +37,7 @@ class LargeTicket : public testing::Test {
         return run.platform.https.sessions.at(0)->downloadTasks.at(0)->request.url->absoluteString();
     }
 
-    // The service hands over what it downloaded.
+    // The service passes on the downloaded file.
     std::optional<int> finish(const Data& body, int status = 200) {
         start("https://assets.example/${f}");
         const auto task = run.platform.https.sessions.back()->downloadTasks.at(0);
@@ -167,7 +167,7 @@ TEST_F(LargeTicket, ATicketOfTheRightSizeThatFailsTheCheckEndsWith65) {
     EXPECT_EQ(output.lines()[0], "Could not validate ticket for " + run.artefact());
 }
 
-// An answer that has no status has none that is wrong.
+// A response without a status has no wrong status.
 TEST_F(LargeTicket, AnAnswerThatIsNoHTTPResponseIsJudgedByItsBody) {
     run.controller.setLargeTicketSize(ticket.size());
     start("https://assets.example/${f}");

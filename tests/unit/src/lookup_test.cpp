@@ -1,4 +1,4 @@
-// The lookup of the ticket's record: the request, and every answer the service could give.
+// The lookup of the ticket's record: the request, and every possible response of the service.
 #include <gtest/gtest.h>
 
 #include <filesystem>

@@ -1,5 +1,5 @@
-// What becomes of a step whose memory is not there. This program's allocation functions are replaced by ones
-// that can be told to fail; untold, they are malloc.
+// The result of a step without memory. This program replaces its allocation functions by functions that can
+// fail on demand; by default they are malloc.
 #include <gtest/gtest.h>
 
 #include <cstdlib>
@@ -16,7 +16,7 @@ namespace {
 constexpr std::size_t kNever = static_cast<std::size_t>(-1);
 thread_local std::size_t failingSize = kNever;
 
-// While it lives, this thread gets no block of that size or more.
+// During its life, this thread gets no block of that size or more.
 class MemoryShortage {
   public:
     explicit MemoryShortage(std::size_t size) { failingSize = size; }
@@ -99,7 +99,7 @@ TEST(OutOfMemory, MakesNoPolicy) {
     class WithoutNamedPolicy : public test::FakeTrustService {
       public:
         trust::NamedPolicyOutcome createNamedPolicy(const std::string&, trust::PolicyRef&) override {
-            failingSize = 0;  // the constructor's name is one more allocation, and not the one in question
+            failingSize = 0;  // the constructor's name is one more allocation, which is not under test
             return trust::NamedPolicyOutcome::unavailable;
         }
     } service;

@@ -20,7 +20,7 @@ class FlatPackageTest : public testing::Test {
     void put(const PackageBuilder& builder) { put(builder.build()); }
     std::string contents() const { return readFile(path); }
 
-    /// How `text` begins, without what depends on the system's wording.
+    /// Compares the beginning of `text`, which does not depend on the system's wording.
     static bool begins(const std::string& text, const std::string& beginning) {
         return text.rfind(beginning, 0) == 0;
     }

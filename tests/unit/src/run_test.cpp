@@ -1,4 +1,4 @@
-// How a run ends: with an exit status of its own, or with its controller's.
+// The end of a run: with its own exit status, or with its controller's.
 #include "src/run.h"
 
 #include <fcntl.h>
@@ -22,7 +22,7 @@ using testing::ElementsAre;
 using testing::IsEmpty;
 using testing::StartsWith;
 
-/// A bundle that the service has a ticket for, and nobody who answers.
+/// A bundle with a ticket at the service, which never responds.
 class Run : public testing::Test {
   protected:
     int operate(std::uint8_t operation, const std::string& path) {

@@ -24,7 +24,7 @@ bool decodes(const Data& container) {
     satchel_view view;
     view.version = 99;
     const std::int32_t result = satchel_decode_header(container.data(), container.size(), &view);
-    // Whatever was in the view, a refusal leaves nothing there.
+    // Whatever the view's earlier value, a refusal clears it.
     EXPECT_EQ(view == satchel_view{}, result != 0);
     return result == 0;
 }
@@ -47,7 +47,7 @@ TEST(SatchelFraming, LocatesEveryPart) {
     EXPECT_EQ(view.version, 1);
 }
 
-// The one container that no builder had a hand in.
+// The only container here that no builder has made.
 TEST(SatchelFraming, IsLittleEndianThroughout) {
     constexpr std::uint8_t kHeader[] = {0x73, 0x38, 0x63, 0x68, 0x01, 0x00, 0xAB, 0xCD,
                                         0x02, 0x01, 0x00, 0x00, 0x03, 0x00, 0x00, 0x00};
@@ -101,7 +101,7 @@ TEST(SatchelFraming, RefusesOneByteMore) {
 TEST(SatchelFraming, RefusesEveryPrefix) {
     const Data container = framedSatchel().build();
     for (std::size_t size = 0; size < container.size(); ++size) {
-        // A buffer of its own, so that a read behind its end is seen.
+        // In its own buffer, so that a read after its end is detected.
         const Data prefix(container.begin(), container.begin() + static_cast<std::ptrdiff_t>(size));
         ASSERT_FALSE(decodes(prefix)) << size;
     }

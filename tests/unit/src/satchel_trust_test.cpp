@@ -201,7 +201,7 @@ TEST_F(SatchelTrust, RefusesEveryPrefix) {
     const Data container = SatchelBuilder::of(chain, payload).build();
     ASSERT_EQ(verify(container), status::kSuccess);
     for (std::size_t size = 0; size < container.size(); ++size) {
-        // A buffer of its own, so that a read behind its end is seen.
+        // In its own buffer, so that a read after its end is detected.
         const Data prefix(container.begin(), container.begin() + static_cast<std::ptrdiff_t>(size));
         ASSERT_EQ(validatedTicket(prefix), nullptr) << size;
     }
@@ -231,8 +231,8 @@ TEST_F(SatchelTrust, RefusesAnElementThatIsNoCertificate) {
               status::kBadCertificates);
 }
 
-// A chain whose leaf has exactly that many bytes: an extension grows until it does, and since the length of a
-// signature is a matter of luck, it may take a few.
+// A chain whose leaf has exactly that many bytes. An extension grows until it does. The length of a signature
+// varies, so this may need several tries.
 IssuedChain chainWithLeafOf(std::size_t size) {
     TicketChain fields;
     std::size_t filler = size - 1000;

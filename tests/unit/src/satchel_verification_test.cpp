@@ -1,5 +1,5 @@
-// Verification step by step, over a trust service whose every answer is set: which refusal has which status,
-// what the service is asked, and what it is never asked.
+// Verification step by step, over a trust service with fixed results: the status of each refusal, the calls
+// to the service, and the calls that never happen.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 

@@ -1,4 +1,4 @@
-// Which servers the controller lets answer.
+// The servers that the controller accepts.
 #include <gtest/gtest.h>
 
 #include "foundation/value.h"

@@ -1,4 +1,4 @@
-// What a damaged container or payload still says of itself, and which rule it breaks first.
+// The readable fields of a damaged container or payload, and the first rule that it breaks.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 

@@ -29,7 +29,7 @@ bool accepts(const TicketPayloadBuilder& payload) {
     return decode(payload.build()) != nullptr;
 }
 
-// The hash alone, without what fills the record.
+// Only the hash, without the record's padding.
 Data hashAt(const tm_ticket_ptr& ticket, std::uint64_t index) {
     tm_cdhash record;
     if (tm_ticket_copy_cdhash(ticket.get(), index, &record) != 0) return {};
@@ -37,7 +37,7 @@ Data hashAt(const tm_ticket_ptr& ticket, std::uint64_t index) {
     return {hash.begin(), hash.end()};
 }
 
-// As many entries of zeros as asked for, with the count that belongs to them.
+// That many entries of zeros, with the correct count.
 TicketPayloadBuilder zeroEntries(std::uint16_t version, std::uint16_t hashLength, std::size_t count) {
     const std::size_t entrySize = version == 2 ? hashLength + 1U : hashLength;
     TicketPayloadBuilder builder;
@@ -81,7 +81,7 @@ TEST(TicketPayload, ReadsEveryFieldOfAVersion1Ticket) {
     EXPECT_EQ(hashAt(ticket, 1), hashOf(50));
 }
 
-// The one payload that no builder had a hand in.
+// The only payload here that no builder has made.
 TEST(TicketPayload, IsLittleEndianThroughout) {
     constexpr std::uint8_t kPayload[] = {'m',  '8',  't',  'k',   // magic
                                          0x02, 0x00, 0x14, 0x00,  // version 2, hash length 20
@@ -154,7 +154,7 @@ TEST(TicketPayload, RefusesOneByteBehindTheEntries) {
 TEST(TicketPayload, RefusesEveryPrefix) {
     const Data payload = TicketPayloadBuilder().entry(2, hashOf(1)).entry(1, hashOf(2)).build();
     for (std::size_t size = 0; size < payload.size(); ++size) {
-        // A buffer of its own, so that a read behind its end is seen.
+        // In its own buffer, so that a read after its end is detected.
         const Data prefix(payload.begin(), payload.begin() + static_cast<std::ptrdiff_t>(size));
         ASSERT_EQ(decode(prefix), nullptr) << size;
     }
@@ -169,8 +169,8 @@ TEST(TicketPayload, RefusesACountThatTheSizeDoesNotBearOut) {
     EXPECT_FALSE(accepts(TicketPayloadBuilder().version(1).count(0x40000000)));
 }
 
-// No whole number of entries of any size ends at 16 MiB or one byte behind it, so that the nearest payloads
-// on either side show where the limit is.
+// No whole number of entries of any size ends at 16 MiB or one byte after it. So the nearest payloads on
+// either side show the limit.
 TEST(TicketPayload, AcceptsTheLargestTicketOf16MiBOrLess) {
     const Data payload = zeroEntries(1, 20, 838859).build();
     ASSERT_EQ(payload.size(), 16777204U);

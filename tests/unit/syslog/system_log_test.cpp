@@ -15,7 +15,8 @@
 
 namespace {
 
-// What reached syslog(3). The functions below stand in for the C library's: those of a program come first.
+// The calls to syslog(3). The functions below replace the C library's: a program's own functions take
+// precedence.
 struct Recorded {
     std::vector<std::string> opened;
     std::vector<int> facilities;

@@ -1,5 +1,5 @@
-// What a certificate's bytes must be. Each row is a certificate with one thing changed, under a signature
-// that is as good as before; no rule here is a library's.
+// The grammar of a certificate's bytes. Each row is a certificate with one change under a valid signature;
+// every rule here is our own, not a library's.
 #include <gtest/gtest.h>
 
 #include "elements.h"
@@ -39,7 +39,7 @@ Data validity(const Data& from, const Data& until) {
 const Data kFrom = time(0x17, "200101000000Z");
 const Data kUntil = time(0x17, "491231235959Z");
 
-/// One extension, 1.2.3, of everything behind its identifier.
+/// One extension, 1.2.3, with these bytes after its identifier.
 Data extensionsOf(const Data& behind) {
     return derElement(0xA3, derElement(0x30, derElement(0x30, joined({bytes({6, 2, 0x2A, 3}), behind}))));
 }
@@ -51,7 +51,7 @@ Data nameOf(std::uint8_t type, std::string_view text) {
                                                                       derElement(type, asBytes(text))}))));
 }
 
-/// An AlgorithmIdentifier that nobody knows, with those parameters.
+/// An unknown AlgorithmIdentifier with those parameters.
 Data unknownAlgorithm(const Data& parameters) {
     return derElement(0x30, joined({bytes({6, 2, 0x2A, 3}), parameters}));
 }

@@ -116,8 +116,8 @@ TEST(ChainBuilder, EndsInAThicketOfSelfIssuedCertificates) {
 }
 
 TEST(ChainBuilder, MakesNoMoreSignatureChecksThanItsLimit) {
-    // One name for all and no key identifiers: each certificate could have issued each, by all that can be
-    // seen without checking a signature. The next in the list is the one that did.
+    // One name for all and no key identifiers: without checking a signature, each certificate could be the
+    // issuer of each. The next in the list is the real issuer.
     std::vector<IssuedCertificate> keys;
     CertificateFields fields = authority("Same", "same0");
     fields.subjectKeyIdentifier = fields.authorityKeyIdentifier = test::KeyIdentifier::omitted();
@@ -159,8 +159,8 @@ TEST(ChainBuilder, MakesNoCheckBehindTheChainThatItFinds) {
 constexpr const char* kGivenUp =
     "the search for a chain was given up, since the certificates allow too many or too long chains";
 
-/// A leaf below levels of certificates, each of which could have issued each of the level below: the same
-/// name and key under several serial numbers.
+/// A leaf below levels of certificates, where each could have issued each of the level below: the same name
+/// and key under several serial numbers.
 Scene ladder(int levels, int width) {
     Scene scene{test::TicketChain()};
     scene.list.clear();
@@ -179,7 +179,7 @@ Scene ladder(int levels, int width) {
     return scene;
 }
 
-/// More certificates of one name than there may be checks.
+/// More certificates of one name than the limit of checks.
 Scene thicket() {
     Scene scene{test::TicketChain()};
     CertificateFields fields = authority("Same", "same0");

@@ -1,4 +1,4 @@
-// What the user's distrust of a certificate reaches.
+// The reach of the user's distrust of a certificate.
 #include <gtest/gtest.h>
 
 #include "scene.h"
@@ -106,7 +106,7 @@ TEST_P(Distrust, IsNotOfANamesake) {
     EXPECT_EQ(verdictWithout(issueCertificate(namesake, &intermediate).der), Verdict::unspecified);
 }
 
-/// A leaf whose key is written in another way, and another name and serial number besides.
+/// A leaf with another encoding of its key, and with another name and serial number.
 Data inAnotherForm(const ChainFields& fields, const IssuedCertificate& issuer, Data (*form)(ByteView)) {
     CertificateFields odd = fields.leaf;
     odd.subject = test::commonName("Another");

@@ -67,8 +67,8 @@ TEST(TicketSignature, NeverVerifiesWithAnRsaKey) {
     EXPECT_FALSE(verifyEcdsa(publicKey(KeyKind::rsa2048), asBytes("message"), signature));
 }
 
-// Encodings of the second published signature, over "test": what each is, and whether it verifies. Strict DER
-// alone does; a reason stands where something unusual is let through.
+// Encodings of the second published signature, over "test": a description, and whether it verifies. Only
+// strict DER does; each unusual accepted form has its reason.
 
 Data r() {
     return positive(kTestR);
@@ -83,7 +83,7 @@ Data withByte(Data bytes, std::size_t index, unsigned value) {
     bytes.at(index) = static_cast<std::byte>(value);
     return bytes;
 }
-/// The SEQUENCE's contents behind other bytes for tag and length.
+/// The SEQUENCE's contents after other bytes for tag and length.
 Data headed(std::string_view head, std::string_view tail = "") {
     return ByteWriter().bytes(fromHex(head)).bytes(r()).bytes(s()).bytes(fromHex(tail)).data();
 }

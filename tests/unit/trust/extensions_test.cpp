@@ -1,4 +1,4 @@
-// What the value of each extension must be, byte by byte.
+// The value of each extension, byte by byte.
 #include "trust/extensions.h"
 
 #include <gmock/gmock.h>

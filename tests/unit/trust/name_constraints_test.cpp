@@ -33,8 +33,8 @@ struct SubtreeRow {
     const char* title;
     std::string name;
     std::string subtree;
-    bool isPermitted;  // where the subtree is permitted
-    bool isExcluded;   // where it is excluded
+    bool isPermitted;  // the expected result if the subtree is permitted
+    bool isExcluded;   // the expected result if the subtree is excluded
 };
 
 class DnsSubtree : public testing::TestWithParam<SubtreeRow> {};

@@ -1,4 +1,4 @@
-// Prints what the security library that the dynamic loader finds says under the ticket policy's name.
+// Prints the ticket policy of the security library that the dynamic loader finds.
 #include <iostream>
 
 #include "trust/trust_service.h"

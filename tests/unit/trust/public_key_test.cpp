@@ -1,4 +1,4 @@
-// Which keys can be used, what stays the same of a key in every form, and which signatures a key verifies.
+// Usable keys, the identity of a key in every form, and the signatures that a key verifies.
 #include "trust/public_key.h"
 
 #include <gtest/gtest.h>
@@ -63,7 +63,7 @@ INSTANTIATE_TEST_SUITE_P(Of, UsableKey,
                                          Usable{"Ed25519", KeyKind::ed25519, "", 253, ""}),
                          [](const auto& tested) { return tested.param.name; });
 
-/// The curves that are known besides those that KeyKind has: each has its base point as a key.
+/// The known curves beside those of KeyKind: each has its base point as a key.
 TEST(UsableKey, MayBeOnAnyCurveOfTheTable) {
     for (const char* name : {"secp256k1", "brainpoolP224r1", "brainpoolP256r1", "brainpoolP320r1",
                              "brainpoolP384r1", "brainpoolP512r1"}) {
@@ -332,7 +332,8 @@ TEST(CertificateSignature, OfAPssKeyIsPss) {
     })));
 }
 
-/// A PSS key of which every signature has SHA-256, MGF1 with SHA-256 and a salt of at least `salt` bytes.
+/// A PSS key that restricts every signature to SHA-256, MGF1 with SHA-256 and a salt of at least `salt`
+/// bytes.
 Data limitedPssKey(const Data& key, unsigned salt) {
     const Data pss = bytes({6, 9, 0x2A, 0x86, 0x48, 0x86, 0xF7, 0x0D, 1, 1, 0x0A});
     const Data sha256 = derElement(0x30, bytes({6, 9, 0x60, 0x86, 0x48, 1, 0x65, 3, 4, 2, 1}));

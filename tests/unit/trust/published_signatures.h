@@ -1,4 +1,4 @@
-// The published ECDSA signatures of RFC 6979, A.2.5 (P-256, SHA-256), and how signatures are put together.
+// The published ECDSA signatures of RFC 6979, A.2.5 (P-256, SHA-256), and functions to encode signatures.
 #pragma once
 
 #include <string>

@@ -1,4 +1,4 @@
-// A chain, the anchors around it and a policy: what one evaluation needs.
+// The input of one evaluation: a chain, the anchors around it and a policy.
 #pragma once
 
 #include <memory>

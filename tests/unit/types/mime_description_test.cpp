@@ -1,6 +1,6 @@
-// Descriptions under other languages and from other databases. The library reads the environment once, when
-// it is first asked, so each case runs in a process of its own, forked before any other test asks: death
-// tests come first.
+// Descriptions in other languages and from other databases. The library reads the environment once, at its
+// first use. So each case runs in its own process, forked before any other test uses the library: death tests
+// come first.
 #include <gtest/gtest.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -33,8 +33,7 @@ void describeAndExit(const Variables& variables, const std::string& name) {
 }
 
 void expectDescription(const Variables& variables, const std::string& name, const std::string& description) {
-    // Forked, not started anew: the other style would make the test's directories again, and leave them
-    // behind.
+    // Forked, not started again: the other style would make the test's directories again and leave them.
     GTEST_FLAG_SET(death_test_style, "fast");
     EXPECT_EXIT(describeAndExit(variables, name), testing::ExitedWithCode(0),
                 std::string(kDescribed) + description + "\n");
@@ -47,7 +46,7 @@ TEST(MIMEDescriptionDeathTest, IsEnglishWhateverTheLanguage) {
     expectDescription({{"LANG", "fr_FR.UTF-8"}, {"LANGUAGE", "fr:es"}}, "a.txt", "[Pp]lain text document");
 }
 
-// A database with one type of its own, translated before it is said in English.
+// A database with one type of its own, whose translation is before its English name.
 class OwnDatabase {
   public:
     OwnDatabase() {

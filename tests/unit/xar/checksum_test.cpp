@@ -1,4 +1,4 @@
-// The checksum of the table of contents: found in the heap as the table says, and compared.
+// The checksum of the table of contents: its place in the heap according to the table, and the comparison.
 #include "fixture.h"
 
 namespace pinwell::test {
@@ -144,7 +144,7 @@ TEST_F(ArchiveChecksum, InTwoElementsIsRefusedHoweverTheSecondOneIsHidden) {
         EXPECT_FALSE(opens(
             ArchiveBuilder().checksumElement("<checksum style='sha1'>" + inside + second + "</checksum>")))
             << second;
-    // What only looks like one.
+    // Text that only looks like a checksum.
     for (const char* none : {"<!--<checksum/>-->", "<?x <checksum/>?>", "<a><![CDATA[<checksum/>]]></a>",
                              "<a>&lt;checksum/&gt;</a>", "<Checksum/>", "<a><checksum/></a>"})
         EXPECT_TRUE(opens(ArchiveBuilder().checksumElement(whole + none))) << none;

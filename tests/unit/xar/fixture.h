@@ -22,10 +22,10 @@ struct CloseArchive {
 };
 using OpenArchive = std::unique_ptr<std::remove_pointer_t<xar_t>, CloseArchive>;
 
-/// What a property question answers.
+/// The result of a property call.
 struct Property {
     std::int32_t status = 0;
-    std::optional<std::string> text;  // nothing for null
+    std::optional<std::string> text;  // `nullopt` for null
 
     bool operator==(const Property&) const = default;
 };
@@ -40,7 +40,7 @@ class ArchiveTest : public testing::Test {
     OpenArchive open(const ArchiveBuilder& archive) { return open(archive.build()); }
     bool opens(const ArchiveBuilder& archive) { return open(archive) != nullptr; }
 
-    /// An archive whose table of contents is this document, with a checksum that matches.
+    /// An archive with this document as its table of contents, and with a matching checksum.
     bool opensWithToc(const std::string& xml) { return opens(ArchiveBuilder().toc(xml)); }
 
     static Property property(const OpenArchive& archive, const char* key) {
@@ -49,7 +49,7 @@ class ArchiveTest : public testing::Test {
         return {status, value == nullptr ? std::nullopt : std::optional<std::string>(value)};
     }
 
-    /// Every signature's type in order; nothing for null.
+    /// Every signature's type in order; `nullopt` for null.
     static std::vector<std::optional<std::string>> types(const OpenArchive& archive) {
         std::vector<std::optional<std::string>> all;
         for (auto s = xar_signature_first(archive.get()); s != nullptr; s = xar_signature_next(s)) {
@@ -59,7 +59,8 @@ class ArchiveTest : public testing::Test {
         return all;
     }
 
-    /// What the first signature signs; nothing when that cannot be copied, and then `status` says why.
+    /// The bytes that the first signature signs; `nullopt` if they cannot be copied; `status` then has the
+    /// reason.
     std::optional<Data> signedData(const OpenArchive& archive) {
         std::uint8_t* bytes = nullptr;
         std::uint32_t length = 0;
@@ -79,8 +80,8 @@ class ArchiveTest : public testing::Test {
     int status = 0;
 };
 
-/// The document around these children of the table of contents, after a checksum's element that is right for
-/// an unsigned archive.
+/// The document around these children of the table of contents, after a checksum's element that fits an
+/// unsigned archive.
 inline std::string tocWith(const std::string& children) {
     return R"(<xar><toc><checksum style="sha1"><offset>0</offset><size>20</size></checksum>)" + children +
            "</toc></xar>";

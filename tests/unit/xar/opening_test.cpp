@@ -1,4 +1,4 @@
-// What is opened at all: files, streams, documents.
+// The files, streams and documents that can be opened.
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -183,7 +183,7 @@ TEST_F(ArchiveOpening, OfAnotherEncodingIsRefused) {
     for (const char c : tocWith("")) wide += {c, '\0'};
     EXPECT_FALSE(opensWithToc(wide));
     EXPECT_FALSE(opensWithToc(wide.substr(2)));
-    EXPECT_FALSE(opensWithToc("\x4C\x6F\xA7\x94"));  // "<?xm" in EBCDIC, by which parsers tell it
+    EXPECT_FALSE(opensWithToc("\x4C\x6F\xA7\x94"));  // "<?xm" in EBCDIC, by which parsers recognise it
 }
 
 std::string declared(const std::string& encoding, const std::string& children) {
@@ -200,7 +200,7 @@ TEST_F(ArchiveOpening, OfATableInISO88591ReadsItAsThat) {
     EXPECT_FALSE(opensWithToc(tocWith("<name>\xE9</name>"))) << "which is UTF-8 unless it says otherwise";
 }
 
-// UTF-7, for one, would hide markup from whoever reads the bytes as they are.
+// UTF-7, for example, would hide markup from a reader of the bytes.
 TEST_F(ArchiveOpening, OfATableThatDeclaresAnotherEncodingIsRefused) {
     for (const char* encoding : {"UTF-7", "UTF-16", "ISO-8859-15", "windows-1252", "EBCDIC", "x"})
         EXPECT_FALSE(opensWithToc(declared(encoding, "+ADw-signature/+AD4-"))) << encoding;

@@ -1,4 +1,4 @@
-// Which signatures an archive has, and what they sign.
+// The signatures of an archive, and the signed data.
 #include <gmock/gmock.h>
 
 #include <filesystem>
