@@ -83,20 +83,22 @@ std::optional<bool> isRevoked(PostgresConnection& connection, Environment enviro
 
 /// The same rule as the embedded store's: a hash counts under any name and algorithm, and the other hashes of
 /// a revoked artefact count if one is to have a ticket of its own.
-std::optional<std::string> revokedBeside(PostgresConnection& connection, Environment environment,
-                                         const Record& record, Deadline deadline) {
+std::optional<RevokedElsewhere> revokedBeside(PostgresConnection& connection, Environment environment,
+                                              const Record& record, Deadline deadline) {
     if (record.hashes.empty()) return std::nullopt;
     PostgresArray hashes;
     for (const CodeHash& hash : record.hashes) hashes.bytes(hash.hash);
     const PostgresRows rows = connection.query(
-        "SELECT r.name FROM hash h JOIN record r ON r.environment = h.environment AND r.name = h.name"
-        " WHERE h.environment = $1 AND r.name <> $2 AND r.revoked AND h.hash = ANY ($3::bytea[])"
-        " AND (h.hash = $4 OR h.position = 0) ORDER BY r.name LIMIT 1",
+        "SELECT r.environment, r.name FROM hash h"
+        " JOIN record r ON r.environment = h.environment AND r.name = h.name"
+        " WHERE h.environment IN ($1, 'production') AND (r.environment <> $1 OR r.name <> $2)"
+        " AND r.revoked AND h.hash = ANY ($3::bytea[]) AND (h.hash = $4 OR h.position = 0)"
+        " ORDER BY r.name LIMIT 1",
         {nameOf(environment), record.name, hashes.parameter(),
          PostgresParameter::bytes(record.hashes.front().hash)},
         deadline);
     if (rows.size() == 0) return std::nullopt;
-    return rows.text(0, 0);
+    return RevokedElsewhere{parseEnvironment(rows.text(0, 0)).value_or(environment), rows.text(0, 1)};
 }
 
 /// Of the columns `asset, length(ticket), ticket`, from `column` on; the last may be NULL for an asset.
@@ -369,10 +371,10 @@ PutOutcome PostgresStore::put(Environment environment, const std::vector<SignedR
         for (const SignedRecord& entry : records) {
             const std::optional<bool> before =
                 isRevoked(connection, environment, entry.record.name, deadline);
-            const Action action = actionOf(entry.record, before, occasion);
-            if (!entry.record.revoked && !occasion.reinstates)
-                if (const auto other = revokedBeside(connection, environment, entry.record, deadline))
-                    refuseToGetAround(entry.record, *other);
+            Standing standing{before, std::nullopt};
+            if (!entry.record.revoked)
+                standing.elsewhere = revokedBeside(connection, environment, entry.record, deadline);
+            const Action action = actionOf(environment, entry.record, standing, occasion);
             if (before) {
                 connection.query("DELETE FROM record WHERE environment = $1 AND name = $2",
                                  {nameOf(environment), entry.record.name}, deadline);

@@ -6,26 +6,35 @@
 
 namespace pinwell::lumora {
 
-Action actionOf(const Record& record, std::optional<bool> revokedBefore, const Occasion& occasion) {
-    if (record.revoked) return Action::revoked;
-    if (!revokedBefore) return Action::issued;
-    if (!*revokedBefore) return Action::reissued;
-    if (!occasion.reinstates) {
-        throw RevokedFailure(
-            foundation::format("record %@ (%@) is revoked; nothing was issued. To make it valid again: "
-                               "--reinstate --comment TEXT",
-                               record.name, record.label),
-            record.name);
-    }
-    return Action::reinstated;
+namespace {
+
+constexpr const char* kWayBack = "nothing was issued. To make it valid again: --reinstate --comment TEXT";
+
+[[noreturn]] void refuse(const Record& record) {
+    throw RevokedFailure(
+        foundation::format("record %@ (%@) is revoked; %s", record.name, record.label, kWayBack),
+        record.name);
 }
 
-void refuseToGetAround(const Record& record, const std::string& revoked) {
-    throw RevokedFailure(
-        foundation::format("record %@ (%@) would make software of the revoked record %@ valid; "
-                           "nothing was issued. To make it valid again: --reinstate --comment TEXT",
-                           record.name, record.label, revoked),
-        revoked);
+[[noreturn]] void refuse(Environment environment, const Record& record, const RevokedElsewhere& other) {
+    std::string revoked = other.name;
+    if (other.environment != environment) revoked += foundation::format(" (%s)", toString(other.environment));
+    const std::string text =
+        foundation::format("record %@ (%@) would make software of the revoked record %@ valid; %s",
+                           record.name, record.label, revoked, kWayBack);
+    throw RevokedFailure(text, std::move(revoked));
+}
+
+}  // namespace
+
+Action actionOf(Environment environment, const Record& record, const Standing& before,
+                const Occasion& occasion) {
+    if (record.revoked) return Action::revoked;
+    const bool revoked = before.revoked.value_or(false);
+    if (!revoked && !before.elsewhere) return before.revoked ? Action::reissued : Action::issued;
+    if (occasion.reinstates) return Action::reinstated;
+    if (revoked) refuse(record);
+    refuse(environment, record, *before.elsewhere);
 }
 
 Event makeEvent(Environment environment, const SignedRecord& entry, Action action, const Occasion& occasion,

@@ -111,7 +111,7 @@ class RevokedFailure : public Failure {
     RevokedFailure(const std::string& text, std::string revoked)
         : Failure(EX_DATAERR, text), revoked_(std::move(revoked)) {}
 
-    /// The name of the record that is revoked.
+    /// The name of the record that is revoked; with its environment if that is another one.
     const std::string& revoked() const noexcept { return revoked_; }
 
   private:
@@ -228,6 +228,8 @@ class RecordStore : public RecordSource {
     /// Puts all records into the store, each in the place of an earlier record of its name, and appends an
     /// event for each, in one transaction; or changes nothing. A valid ticket for a revoked record, or for a
     /// hash that another record has revoked, is refused (RevokedFailure), unless the occasion reinstates.
+    /// A ticket does not say of which environment it is. So what is revoked in production counts as revoked
+    /// in every environment; what is revoked in development, in development alone.
     /// When this returns, the change survives a crash.
     ///
     /// If the occasion's request was carried out before, nothing changes, and the outcome is that of the
@@ -269,13 +271,22 @@ class RecordStore : public RecordSource {
     virtual void holdStill(const std::function<void(const std::function<void()>& confirm)>& work) = 0;
 };
 
-/// What putting `record` does to a record of its name that is there already. Throws RevokedFailure if that
-/// would make a revoked record valid and the occasion does not reinstate.
-Action actionOf(const Record& record, std::optional<bool> revokedBefore, const Occasion& occasion);
+/// A revoked record that a valid ticket for another one would get around.
+struct RevokedElsewhere {
+    Environment environment = Environment::production;
+    std::string name;
+};
 
-/// Throws the RevokedFailure of a put whose ticket would vouch for what the record `revoked` has
-/// revoked.
-[[noreturn]] void refuseToGetAround(const Record& record, const std::string& revoked);
+/// What a put finds in the store.
+struct Standing {
+    std::optional<bool> revoked;                // of the record of that name; `nullopt` if there is none
+    std::optional<RevokedElsewhere> elsewhere;  // only for a valid ticket
+};
+
+/// What putting `record` does. Throws RevokedFailure if it would make revoked software valid and the occasion
+/// does not reinstate.
+Action actionOf(Environment environment, const Record& record, const Standing& before,
+                const Occasion& occasion);
 
 /// The event for a put, with its hash.
 Event makeEvent(Environment environment, const SignedRecord& entry, Action action, const Occasion& occasion,

@@ -71,27 +71,35 @@ std::optional<bool> isRevoked(SQLite::Database& database, Environment environmen
     return row.getColumn(0).getInt() != 0;
 }
 
-/// The name of a revoked record that a valid ticket for `record` would get around, although it is another
-/// one; `nullopt` if there is none. Whoever checks a ticket compares the bytes of a hash and not its
-/// algorithm, so the same hash under another name counts; so do the other hashes of a revoked artefact, if
-/// one is to have a ticket of its own. What two artefacts merely hold in common, nested code for instance,
-/// does not.
-std::optional<std::string> revokedBeside(SQLite::Database& database, Environment environment,
-                                         const Record& record) {
+/// A revoked record that a valid ticket for `record` would get around, although it is another one; `nullopt`
+/// if there is none. Whoever checks a ticket compares the bytes of a hash and not its algorithm, so the same
+/// hash under another name counts; so do the other hashes of a revoked artefact, if one is to have a ticket
+/// of its own. What two artefacts merely hold in common, nested code for instance, does not.
+std::optional<RevokedElsewhere> revokedBeside(SQLite::Database& database, Environment environment,
+                                              const Record& record) {
     SQLite::Statement row(database,
-                          "SELECT r.name FROM hash h JOIN record r"
+                          "SELECT r.environment, r.name FROM hash h JOIN record r"
                           " ON r.environment = h.environment AND r.name = h.name"
-                          " WHERE h.hash = ? AND h.environment = ? AND r.name <> ? AND r.revoked"
-                          " AND (? OR h.position = 0) LIMIT 1");
+                          " WHERE h.hash = ?1 AND h.environment IN (?2, 'production')"
+                          " AND (r.environment <> ?2 OR r.name <> ?3) AND r.revoked"
+                          " AND (?4 OR h.position = 0) LIMIT 1");
     for (const CodeHash& hash : record.hashes) {
         row.reset();
         bindBlob(row, 1, hash.hash);
         row.bind(2, environmentText(environment));
         row.bind(3, record.name);
         row.bind(4, &hash == &record.hashes.front() ? 1 : 0);
-        if (row.executeStep()) return row.getColumn(0).getString();
+        if (!row.executeStep()) continue;
+        return RevokedElsewhere{parseEnvironment(row.getColumn(0).getString()).value_or(environment),
+                                row.getColumn(1).getString()};
     }
     return std::nullopt;
+}
+
+Standing standingOf(SQLite::Database& database, Environment environment, const Record& record) {
+    Standing standing{isRevoked(database, environment, record.name), std::nullopt};
+    if (!record.revoked) standing.elsewhere = revokedBeside(database, environment, record);
+    return standing;
 }
 
 void deleteRecord(SQLite::Database& database, Environment environment, const std::string& name) {
@@ -259,11 +267,8 @@ PutOutcome SqliteStore::put(Environment environment, const std::vector<SignedRec
         PutOutcome outcome;
         std::string previous = lastEventHash(*database_);
         for (const SignedRecord& entry : records) {
-            const Action action =
-                actionOf(entry.record, isRevoked(*database_, environment, entry.record.name), occasion);
-            if (!entry.record.revoked && !occasion.reinstates)
-                if (const auto other = revokedBeside(*database_, environment, entry.record))
-                    refuseToGetAround(entry.record, *other);
+            const Action action = actionOf(environment, entry.record,
+                                           standingOf(*database_, environment, entry.record), occasion);
             deleteRecord(*database_, environment, entry.record.name);
             insertRecord(*database_, environment, entry);
             insertHashes(*database_, environment, entry.record);

@@ -263,16 +263,25 @@ TEST_P(RecordStoreTest, IssuesWhatSharesNestedCodeWithARevokedRecord) {
     revoked.record.revoked = true;
     store.put(kProduction, {revoked}, kOccasion);
     EXPECT_NO_THROW(store.put(kProduction, {listing("2/2/b", {3, 2})}, kOccasion));
-    EXPECT_NO_THROW(store.put(Environment::development, {listing("2/3/a", {1})}, kOccasion));
 }
+
+const Occasion kReinstating{Date{300}, "boss", std::nullopt, "found", true};
 
 TEST_P(RecordStoreTest, ReinstatesARevokedHashUnderAnotherNameIfTold) {
     RecordStore& store = openAndKeep();
     SignedRecord revoked = listing("2/2/a", {1});
     revoked.record.revoked = true;
     store.put(kProduction, {revoked}, kOccasion);
-    EXPECT_NO_THROW(
-        store.put(kProduction, {listing("2/3/a", {1})}, {Date{300}, "boss", std::nullopt, "found", true}));
+    EXPECT_NO_THROW(store.put(kProduction, {listing("2/3/a", {1})}, kReinstating));
+}
+
+TEST_P(RecordStoreTest, LogsThatATicketReinstatesAHashThatAnotherRecordHasRevoked) {
+    RecordStore& store = openAndKeep();
+    SignedRecord revoked = listing("2/2/a", {1});
+    revoked.record.revoked = true;
+    store.put(kProduction, {revoked}, kOccasion);
+    EXPECT_EQ(store.put(kProduction, {listing("2/3/a", {1})}, kReinstating).event.action, Action::reinstated);
+    EXPECT_EQ(store.put(kProduction, {listing("2/2/b", {9})}, kReinstating).event.action, Action::issued);
 }
 
 TEST_P(RecordStoreTest, RefusesItAlsoIfTheRevocationComesFromAnotherConnection) {
@@ -282,10 +291,30 @@ TEST_P(RecordStoreTest, RefusesItAlsoIfTheRevocationComesFromAnotherConnection) 
     EXPECT_THROW(store.put(kProduction, {makeRecord("a", "ticket")}, kOccasion), Failure);
 }
 
-TEST_P(RecordStoreTest, RevokesInOneEnvironmentAlone) {
+/// A ticket is as genuine to a client of the one environment as to a client of the other.
+TEST_P(RecordStoreTest, RefusesATicketOfDevelopmentForWhatIsRevokedInProduction) {
     RecordStore& store = openAndKeep();
-    store.put(kProduction, {revokedRecord("a")}, kOccasion);
-    EXPECT_NO_THROW(store.put(Environment::development, {makeRecord("a", "ticket")}, kOccasion));
+    SignedRecord revoked = listing("2/2/a", {1, 2});
+    revoked.record.revoked = true;
+    store.put(kProduction, {revoked}, kOccasion);
+    for (const SignedRecord& entry :
+         {listing("2/2/a", {1, 2}), listing("2/3/a", {1}), listing("2/2/b", {2})}) {
+        try {
+            store.put(Environment::development, {entry}, kOccasion);
+            FAIL() << entry.record.name << " became valid";
+        } catch (const RevokedFailure& failure) {
+            EXPECT_EQ(failure.revoked(), "2/2/a (production)");
+        }
+    }
+    EXPECT_EQ(store.put(Environment::development, {listing("2/2/a", {1})}, kReinstating).event.action,
+              Action::reinstated);
+}
+
+TEST_P(RecordStoreTest, RevokesInDevelopmentForDevelopmentAlone) {
+    RecordStore& store = openAndKeep();
+    store.put(Environment::development, {revokedRecord("a")}, kOccasion);
+    EXPECT_NO_THROW(store.put(kProduction, {makeRecord("a", "ticket")}, kOccasion));
+    EXPECT_THROW(store.put(Environment::development, {makeRecord("a", "ticket")}, kOccasion), RevokedFailure);
 }
 
 TEST_P(RecordStoreTest, ShowsAnOpenReaderWhatAnotherConnectionWrites) {
