@@ -87,7 +87,7 @@ void Connection::start() {
     peer_ = describe(peer);
     identifier_ = context_.table.enter(addressOf(peer), [weak = weak_from_this()] {
         if (const auto self = weak.lock()) {
-            asio::post(self->socket().get_executor(), [self] { self->endIfSilent(); });
+            asio::post(self->socket().get_executor(), [self] { self->makeRoom(); });
         }
     });
     if (identifier_ == 0) return context_.counts.connectionRefused();
@@ -147,7 +147,7 @@ void Connection::awaitRequest() {
 void Connection::beginRequest() {
     if (!mayGoOn()) return close(false);
     phase_ = Phase::reading;
-    context_.table.becomeBusy(identifier_);
+    context_.table.becomeWaiting(identifier_);
     ++served_;
     begun_ = std::chrono::steady_clock::now();
     received_ = 0;
@@ -167,6 +167,7 @@ void Connection::readMore() {
 }
 
 void Connection::onRead(ErrorCode error, std::size_t count) {
+    if (phase_ == Phase::closing) return;
     received_ += count;
     if (error) return refuseUnreadable(error);
     if (!parser_->is_header_done()) {
@@ -227,11 +228,13 @@ void Connection::onHead() {
     const HttpRequest& request = parser_->get();
     if (!request.keep_alive()) closeAfterwards_ = true;
     if (const auto status = refuseHead(request)) return refuse(*status, announcesBody(request));
+    context_.table.becomeBusy(identifier_);
     const std::optional<Answer> answer =
         guarded([&] { return context_.service.answerHead(headOfRequest()); });
     if (answer) return respond(*answer, announcesBody(request));
     if (const auto status = refuseMissingLength(request)) return refuse(*status, announcesBody(request));
     if (parser_->is_done()) return onBody();
+    context_.table.becomeWaiting(identifier_);
     if (expectsContinue(request)) return continueThenRead();
     readMore();
 }
@@ -239,12 +242,14 @@ void Connection::onHead() {
 void Connection::continueThenRead() {
     asio::async_write(*stream_, asio::buffer(kContinue.data(), kContinue.size()),
                       [self = shared_from_this()](ErrorCode error, std::size_t) {
+                          if (self->phase_ == Phase::closing) return;
                           if (error) return self->close(false);
                           self->readMore();
                       });
 }
 
 void Connection::onBody() {
+    context_.table.becomeBusy(identifier_);
     const HttpRequest& request = parser_->get();
     respond(
         *guarded([&] { return std::optional(context_.service.answerBody(headOfRequest(), request.body())); }),
@@ -391,11 +396,12 @@ void Connection::onTimeout() {
     }
 }
 
-void Connection::endIfSilent() {
-    if (phase_ != Phase::silent) return;
+void Connection::makeRoom() {
+    // A service that is to end lets a request finish that has begun.
+    if (phase_ != Phase::silent && (phase_ != Phase::reading || context_.stopping)) return;
     ErrorCode ignored;
-    if (established_) {
-        socket().cancel(ignored);
+    if (phase_ == Phase::silent && established_) {
+        socket().cancel(ignored);  // the read ends, and the connection is closed in good form
         return;
     }
     phase_ = Phase::closing;

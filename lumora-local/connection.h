@@ -89,7 +89,9 @@ class Connection : public std::enable_shared_from_this<Connection> {
     void limitTime(std::chrono::milliseconds time);
     void setTimer();
     void onTimeout();
-    void endIfSilent();
+    /// For another connection of the peer, or since the service is to end. Does nothing while a request is
+    /// being answered.
+    void makeRoom();
 
     boost::asio::ip::tcp::socket& socket();
 

@@ -13,34 +13,44 @@ ConnectionTable::Identifier ConnectionTable::enter(const std::string& address, s
         const std::lock_guard lock(mutex_);
         Peer& peer = peers_[address];
         if (peer.size() >= perAddress_) {
-            const auto oldest =
-                std::find_if(peer.begin(), peer.end(), [](const Entry& e) { return e.silent; });
+            const auto first = [&peer](State state) {
+                return std::find_if(peer.begin(), peer.end(),
+                                    [&](const Entry& e) { return e.state == state; });
+            };
+            auto oldest = first(State::silent);
+            if (oldest == peer.end()) oldest = first(State::waiting);
             if (oldest == peer.end()) return 0;
             evicted = std::move(oldest->close);
             places_.erase(oldest->identifier);
             peer.erase(oldest);
         }
         identifier = ++last_;
-        peer.push_back({identifier, true, std::move(close)});
+        peer.push_back({identifier, State::silent, std::move(close)});
         places_.emplace(identifier, Place{address, std::prev(peer.end())});
     }
     if (evicted) evicted();
     return identifier;
 }
 
-void ConnectionTable::becomeBusy(Identifier connection) {
-    const std::lock_guard lock(mutex_);
-    const auto place = places_.find(connection);
-    if (place != places_.end()) place->second.entry->silent = false;
-}
-
-void ConnectionTable::becomeSilent(Identifier connection) {
+void ConnectionTable::change(Identifier connection, State state) {
     const std::lock_guard lock(mutex_);
     const auto place = places_.find(connection);
     if (place == places_.end()) return;
     Peer& peer = peers_[place->second.address];
-    place->second.entry->silent = true;
+    place->second.entry->state = state;
     peer.splice(peer.end(), peer, place->second.entry);
+}
+
+void ConnectionTable::becomeWaiting(Identifier connection) {
+    change(connection, State::waiting);
+}
+
+void ConnectionTable::becomeBusy(Identifier connection) {
+    change(connection, State::busy);
+}
+
+void ConnectionTable::becomeSilent(Identifier connection) {
+    change(connection, State::silent);
 }
 
 void ConnectionTable::leave(Identifier connection) {
@@ -59,7 +69,8 @@ void ConnectionTable::closeSilent() {
         const std::lock_guard lock(mutex_);
         for (auto& [address, peer] : peers_) {
             for (Entry& entry : peer) {
-                if (entry.silent && entry.close) closing.push_back(std::exchange(entry.close, nullptr));
+                if (entry.state == State::silent && entry.close)
+                    closing.push_back(std::exchange(entry.close, nullptr));
             }
         }
     }

@@ -1,8 +1,9 @@
 // Which connections are open, and which one makes room when a peer has too many.
 //
 // A connection is silent while it has no request under way: before and during the handshake, and between
-// requests. A peer's silent connections beyond the bound cost it its oldest one, so that nobody keeps others
-// out by opening connections and saying nothing.
+// requests. It waits while a request has arrived in part. Beyond the bound a peer loses its oldest silent
+// connection, or else the one that has waited longest. So nobody keeps others at the same address out by
+// opening connections and saying nothing, or by saying half of something.
 #pragma once
 
 #include <cstdint>
@@ -21,13 +22,16 @@ class ConnectionTable {
 
     explicit ConnectionTable(std::size_t perAddress) : perAddress_(perAddress) {}
 
-    /// Enters a silent connection of the peer at `address`. `close` ends the connection soon; it is called
-    /// without a lock held, from any thread, at most once, and not after leave() has returned. If the peer
-    /// has too many connections, its oldest silent one is closed; if none is silent, nothing is entered and
-    /// the result is 0.
+    /// Enters a silent connection of the peer at `address`. `close` ends the connection soon, unless it has
+    /// become busy; it is called without a lock held, from any thread, at most once, and not after leave()
+    /// has returned. If the peer has too many connections, its oldest silent one is closed, or else the one
+    /// that has waited longest; if all are busy, nothing is entered and the result is 0.
     Identifier enter(const std::string& address, std::function<void()> close);
 
-    /// A request begins.
+    /// The first bytes of a request are here.
+    void becomeWaiting(Identifier connection);
+
+    /// The request is whole.
     void becomeBusy(Identifier connection);
 
     /// The request is answered; the connection counts as the peer's newest silent one.
@@ -41,17 +45,20 @@ class ConnectionTable {
     std::size_t count() const;
 
   private:
+    enum class State { silent, waiting, busy };
     struct Entry {
         Identifier identifier = 0;
-        bool silent = true;
+        State state = State::silent;
         std::function<void()> close;
     };
-    using Peer = std::list<Entry>;  // the silent ones are in the order in which they fell silent
+    using Peer = std::list<Entry>;  // those of one state are in the order in which they came to it
 
     struct Place {
         std::string address;
         Peer::iterator entry;
     };
+
+    void change(Identifier connection, State state);
 
     const std::size_t perAddress_;
     mutable std::mutex mutex_;

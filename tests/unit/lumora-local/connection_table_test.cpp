@@ -39,7 +39,22 @@ TEST_F(ConnectionTableTest, SparesAConnectionWithARequestUnderWay) {
     EXPECT_EQ(closed_, (std::vector<int>{2}));
 }
 
-TEST_F(ConnectionTableTest, RefusesOneMoreWhenNoneIsSilent) {
+TEST_F(ConnectionTableTest, ClosesTheRequestThatHasWaitedLongestWhenNoneIsSilent) {
+    const auto first = enter("a", 1);
+    table_.becomeWaiting(enter("a", 2));
+    table_.becomeWaiting(first);
+    EXPECT_NE(enter("a", 3), 0U);
+    EXPECT_EQ(closed_, (std::vector<int>{2}));
+}
+
+TEST_F(ConnectionTableTest, SparesAWaitingRequestWhileAnotherConnectionIsSilent) {
+    table_.becomeWaiting(enter("a", 1));
+    enter("a", 2);
+    enter("a", 3);
+    EXPECT_EQ(closed_, (std::vector<int>{2}));
+}
+
+TEST_F(ConnectionTableTest, RefusesOneMoreWhenAllAreBusy) {
     table_.becomeBusy(enter("a", 1));
     table_.becomeBusy(enter("a", 2));
     EXPECT_EQ(enter("a", 3), 0U);
@@ -67,6 +82,7 @@ TEST_F(ConnectionTableTest, ForgetsConnectionsThatLeave) {
 
 TEST_F(ConnectionTableTest, ClosesTheSilentOnesOnceAtTheEnd) {
     table_.becomeBusy(enter("a", 1));
+    table_.becomeWaiting(enter("c", 3));
     enter("b", 2);
     table_.closeSilent();
     table_.closeSilent();

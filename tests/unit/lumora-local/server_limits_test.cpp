@@ -1,5 +1,6 @@
 // What the server does when its limits are reached: it runs here, in this process, with limits small enough
 // to reach.
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <netinet/in.h>
 #include <poll.h>
@@ -8,6 +9,7 @@
 #include <unistd.h>
 
 #include <atomic>
+#include <deque>
 #include <mutex>
 #include <stdexcept>
 #include <thread>
@@ -208,6 +210,41 @@ TEST(SilentConnections, DoNotHoldUpTheStop) {
     EXPECT_EQ(healthAt(server.port()), "HTTP/1.1 200");
     server.finish();
     EXPECT_TRUE(silent.isClosed(0));
+}
+
+/// A client whose request has arrived but for its body.
+class HalfSentRequest {
+  public:
+    explicit HalfSentRequest(int port) : client_(port) {
+        client_.send(std::string("POST ") + test::kLookupPath +
+                     " HTTP/1.1\r\nHost: localhost\r\nContent-Type: application/json\r\n"
+                     "Content-Length: 2\r\nExpect: 100-continue\r\n\r\n");
+        EXPECT_EQ(client_.readUntil("\r\n\r\n"), "HTTP/1.1 100 Continue\r\n\r\n");
+    }
+
+    RawClient& client() { return client_; }
+
+  private:
+    RawClient client_;
+};
+
+TEST(HalfSentRequests, MakeRoomTheOldestFirst) {
+    LimitedServer server({.connectionsPerAddress = 64, .requestTime = std::chrono::hours(1)});
+    std::deque<HalfSentRequest> halves;
+    for (int i = 0; i < 64; ++i) halves.emplace_back(server.port());
+    EXPECT_EQ(healthAt(server.port()), "HTTP/1.1 200");
+    EXPECT_EQ(halves.front().client().readToEnd(), "");
+    halves.back().client().send("{}");
+    EXPECT_THAT(halves.back().client().readUntil("}"), testing::StartsWith("HTTP/1.1 "));
+}
+
+TEST(HalfSentRequests, FinishWhenTheServiceIsToEnd) {
+    LimitedServer server({.requestTime = std::chrono::hours(1)});
+    HalfSentRequest half(server.port());
+    std::thread ending([&] { server.finish(); });
+    half.client().send("{}");
+    EXPECT_THAT(half.client().readUntil("}"), testing::StartsWith("HTTP/1.1 "));
+    ending.join();
 }
 
 TEST(Server, SaysThatItsRecordsCannotBeReadAndStaysUp) {
