@@ -6,7 +6,7 @@
 #include "lumora-local/key_file.h"
 #include "lumora-local/openssl_handles.h"
 #include "lumora-local/service_settings.h"
-#include "lumora-local/signing_process.h"
+#include "lumora-local/token_key.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -53,7 +53,7 @@ bool isOnP256(EVP_PKEY* key) {
 }  // namespace
 
 std::unique_ptr<SigningKey> openSigningKey(const std::string& key, const std::string& passphraseFile) {
-    if (isTokenKey(key)) return startSigningProcess(key);
+    if (isTokenKey(key)) return startSigningProcess([&key] { return openTokenKey(key); });
     KeyHandle read = readKeyFile(key, passphraseFile);
     if (!isOnP256(read.get())) {
         throw Failure(EX_CONFIG,

@@ -1,5 +1,6 @@
 #include "lumora-local/signing_process.h"
 
+#include <signal.h>
 #include <sys/socket.h>
 #include <sys/time.h>
 #include <sys/wait.h>
@@ -17,7 +18,6 @@
 #include "foundation/format.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/sha256.h"
-#include "lumora-local/token_key.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -25,6 +25,7 @@ namespace {
 using foundation::ByteView;
 using foundation::Data;
 using foundation::FileDescriptor;
+using OpenKey = std::function<std::unique_ptr<DigestSigner>()>;
 
 // A question is the digest to sign. An answer is one byte, an exit status, two bytes, the length of what
 // follows, lowest first, and that many bytes: a signature or the text of a failure. The child begins with an
@@ -33,8 +34,10 @@ constexpr std::size_t kDigestSize = 32;
 constexpr std::size_t kAnswerHead = 3;
 constexpr std::size_t kMaximumAnswer = 4096;
 
-// For a signature. Opening a token may take its owner longer.
-constexpr timeval kPatience{30, 0};
+timeval toTimeval(std::chrono::milliseconds time) {
+    const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(time);
+    return {seconds.count(), std::chrono::microseconds(time - seconds).count()};
+}
 
 /// Returns false at the end of the stream, and if it fails.
 bool readFully(int descriptor, std::byte* room, std::size_t size) {
@@ -79,10 +82,10 @@ bool answerWith(int descriptor, Work&& work) {
 }
 
 /// All that the child does.
-void serveToken(int descriptor, const std::string& uri) {
-    std::unique_ptr<TokenKey> key;
+void serveToken(int descriptor, const OpenKey& open) {
+    std::unique_ptr<DigestSigner> key;
     const bool sent = answerWith(descriptor, [&] {
-        key = std::make_unique<TokenKey>(uri);
+        key = open();
         return key->publicKey();
     });
     std::array<std::byte, kDigestSize> digest{};
@@ -93,7 +96,7 @@ void serveToken(int descriptor, const std::string& uri) {
 
 class KeyBehindProcess final : public SigningKey {
   public:
-    explicit KeyBehindProcess(const std::string& uri) {
+    KeyBehindProcess(const OpenKey& open, std::chrono::milliseconds patience) {
         std::array<int, 2> ends{};
         if (::socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends.data()) != 0) failStarting();
         ours_ = FileDescriptor(ends[0]);
@@ -102,13 +105,14 @@ class KeyBehindProcess final : public SigningKey {
         if (child_ < 0) failStarting();
         if (child_ == 0) {
             ours_.reset();
-            serveToken(theirs.get(), uri);
+            serveToken(theirs.get(), open);
             ::_exit(EX_OK);
         }
         theirs.reset();
         try {
             publicKey_ = receive();
-            ::setsockopt(ours_.get(), SOL_SOCKET, SO_RCVTIMEO, &kPatience, sizeof kPatience);
+            const timeval limit = toTimeval(patience);
+            ::setsockopt(ours_.get(), SOL_SOCKET, SO_RCVTIMEO, &limit, sizeof limit);
         } catch (const Failure&) {
             end();
             throw;
@@ -156,11 +160,15 @@ class KeyBehindProcess final : public SigningKey {
         return bytes;
     }
 
-    /// The child ends when nothing can be asked any more. One whose token does not answer is not waited for.
+    /// The child ends when nothing can be asked any more. One whose token does not answer is killed, and not
+    /// waited for: a device driver may hold it.
     void end() {
         const bool answers = static_cast<bool>(ours_);
         ours_.reset();
-        if (!answers) return;
+        if (!answers) {
+            if (child_ > 0) ::kill(child_, SIGKILL);
+            return;
+        }
         while (child_ > 0 && ::waitpid(child_, nullptr, 0) < 0 && errno == EINTR) continue;
     }
 
@@ -172,8 +180,9 @@ class KeyBehindProcess final : public SigningKey {
 
 }  // namespace
 
-std::unique_ptr<SigningKey> startSigningProcess(const std::string& uri) {
-    return std::make_unique<KeyBehindProcess>(uri);
+std::unique_ptr<SigningKey> startSigningProcess(const std::function<std::unique_ptr<DigestSigner>()>& open,
+                                                std::chrono::milliseconds patience) {
+    return std::make_unique<KeyBehindProcess>(open, patience);
 }
 
 }  // namespace pinwell::lumora

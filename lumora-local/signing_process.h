@@ -1,15 +1,36 @@
 // The process that speaks to a token, seen from the one that makes tickets.
 #pragma once
 
+#include <chrono>
+#include <functional>
 #include <memory>
-#include <string>
 
+#include "foundation/bytes.h"
 #include "lumora-local/signing_key.h"
 
 namespace pinwell::lumora {
 
-/// Starts a child that opens the key and signs until the result is destroyed. Throws Failure: EX_CONFIG if
-/// the URI names no key that can be used, or if this program was built without PKCS #11.
-std::unique_ptr<SigningKey> startSigningProcess(const std::string& uri);
+/// A key on P-256 as the child holds it. One thread at a time.
+class DigestSigner {
+  public:
+    virtual ~DigestSigner() = default;
+
+    /// DER of SubjectPublicKeyInfo.
+    virtual foundation::Data publicKey() const = 0;
+
+    /// ECDSA over a digest of 32 bytes, in DER. Throws Failure (EX_IOERR).
+    virtual foundation::Data signDigest(foundation::ByteView digest) const = 0;
+};
+
+/// How long a signature may take. To open a token may take its owner longer.
+inline constexpr std::chrono::milliseconds kSigningPatience{30'000};
+
+/// Starts a child, which calls `open` and signs until the result is destroyed. Throws what `open` throws, if
+/// that is a Failure; its exit status and text come over from the child.
+///
+/// sign() throws Failure (EX_IOERR) if the child has ended, or does not answer in time. Nothing is asked of
+/// it after that, and the end does not wait for it.
+std::unique_ptr<SigningKey> startSigningProcess(const std::function<std::unique_ptr<DigestSigner>()>& open,
+                                                std::chrono::milliseconds patience = kSigningPatience);
 
 }  // namespace pinwell::lumora

@@ -51,11 +51,6 @@ UriHandle parseUri(const std::string& text) {
     return uri;
 }
 
-}  // namespace
-
-// Not in an anonymous namespace: TokenKey::Session, which is in none, holds them.
-namespace token_detail {
-
 /// The libraries that are asked, for as long as this is there.
 class Modules {
   public:
@@ -96,13 +91,6 @@ struct Token {
     CK_SLOT_ID slot;
     bool needsLogin;
 };
-
-}  // namespace token_detail
-
-namespace {
-
-using token_detail::Modules;
-using token_detail::Token;
 
 std::vector<Token> tokensThatFit(const Modules& modules, P11KitUri* uri) {
     std::vector<Token> tokens;
@@ -153,9 +141,8 @@ Data publicKeyOf(const std::string& uri, Data point) {
     return encodeDer<const EVP_PKEY>(i2d_PUBKEY, key.get(), "encode a public key");
 }
 
-}  // namespace
-
-struct TokenKey::Session {
+/// An open session with the token, and where the key is in it.
+struct Session {
     explicit Session(const std::string& text)
         : name(text.substr(0, text.find('?'))),
           uri(parseUri(text)),
@@ -223,8 +210,8 @@ struct TokenKey::Session {
 
     std::string name;
     UriHandle uri;
-    token_detail::Modules modules;
-    token_detail::Token token{};
+    Modules modules;
+    Token token{};
     CK_SESSION_HANDLE session = 0;
     CK_OBJECT_HANDLE key = 0;
     Passphrase pin;
@@ -232,38 +219,46 @@ struct TokenKey::Session {
     Data publicKey;
 };
 
-TokenKey::TokenKey(const std::string& uri) : session_(std::make_unique<Session>(uri)) {}
+class TokenKey final : public DigestSigner {
+  public:
+    explicit TokenKey(const std::string& uri) : session_(std::make_unique<Session>(uri)) {}
 
-TokenKey::~TokenKey() = default;
+    Data publicKey() const override { return session_->publicKey; }
 
-Data TokenKey::publicKey() const {
-    return session_->publicKey;
-}
-
-Data TokenKey::signDigest(ByteView digest) const {
-    CK_MECHANISM mechanism{CKM_ECDSA, nullptr, 0};
-    CK_FUNCTION_LIST& calls = *session_->token.module;
-    std::array<unsigned char, 2 * kCoordinate> numbers{};
-    CK_ULONG length = numbers.size();
-    CK_RV result = calls.C_SignInit(session_->session, &mechanism, session_->key);
-    if (result == CKR_OK && session_->asksEachTime) result = session_->sayPin(CKU_CONTEXT_SPECIFIC);
-    if (result == CKR_OK) {
-        // The interface takes bytes that it does not change.
-        auto* bytes = const_cast<unsigned char*>(octets(digest));
-        result = calls.C_Sign(session_->session, bytes, digest.size(), numbers.data(), &length);
+    Data signDigest(ByteView digest) const override {
+        CK_MECHANISM mechanism{CKM_ECDSA, nullptr, 0};
+        CK_FUNCTION_LIST& calls = *session_->token.module;
+        std::array<unsigned char, 2 * kCoordinate> numbers{};
+        CK_ULONG length = numbers.size();
+        CK_RV result = calls.C_SignInit(session_->session, &mechanism, session_->key);
+        if (result == CKR_OK && session_->asksEachTime) result = session_->sayPin(CKU_CONTEXT_SPECIFIC);
+        if (result == CKR_OK) {
+            // The interface takes bytes that it does not change.
+            auto* bytes = const_cast<unsigned char*>(octets(digest));
+            result = calls.C_Sign(session_->session, bytes, digest.size(), numbers.data(), &length);
+        }
+        if (result != CKR_OK || length != numbers.size()) {
+            throw Failure(EX_IOERR, format("%@: cannot sign: %s", session_->name, p11_kit_strerror(result)));
+        }
+        SignatureHandle signature(ECDSA_SIG_new());
+        NumberHandle r(BN_bin2bn(numbers.data(), kCoordinate, nullptr));
+        NumberHandle s(BN_bin2bn(numbers.data() + kCoordinate, kCoordinate, nullptr));
+        require(signature != nullptr && r != nullptr && s != nullptr &&
+                    ECDSA_SIG_set0(signature.get(), r.get(), s.get()) == 1,
+                "encode a signature");
+        static_cast<void>(r.release());  // the signature has them
+        static_cast<void>(s.release());
+        return encodeDer<const ECDSA_SIG>(i2d_ECDSA_SIG, signature.get(), "encode a signature");
     }
-    if (result != CKR_OK || length != numbers.size()) {
-        throw Failure(EX_IOERR, format("%@: cannot sign: %s", session_->name, p11_kit_strerror(result)));
-    }
-    SignatureHandle signature(ECDSA_SIG_new());
-    NumberHandle r(BN_bin2bn(numbers.data(), kCoordinate, nullptr));
-    NumberHandle s(BN_bin2bn(numbers.data() + kCoordinate, kCoordinate, nullptr));
-    require(signature != nullptr && r != nullptr && s != nullptr &&
-                ECDSA_SIG_set0(signature.get(), r.get(), s.get()) == 1,
-            "encode a signature");
-    static_cast<void>(r.release());  // the signature has them
-    static_cast<void>(s.release());
-    return encodeDer<const ECDSA_SIG>(i2d_ECDSA_SIG, signature.get(), "encode a signature");
+
+  private:
+    const std::unique_ptr<Session> session_;
+};
+
+}  // namespace
+
+std::unique_ptr<DigestSigner> openTokenKey(const std::string& uri) {
+    return std::make_unique<TokenKey>(uri);
 }
 
 }  // namespace pinwell::lumora

@@ -1,4 +1,4 @@
-// A signing key in a PKCS #11 token, used in this very process.
+// A signing key in a PKCS #11 token, used in the process that opens it.
 //
 // The URI (RFC 7512) names the token by `token`, `serial`, `manufacturer` or `model`, and the key by `object`
 // (its label) or `id`. `module-path` names the token's library; without it, those that p11-kit's
@@ -10,28 +10,12 @@
 #include <memory>
 #include <string>
 
-#include "foundation/bytes.h"
+#include "lumora-local/signing_process.h"
 
 namespace pinwell::lumora {
 
-/// One thread at a time.
-class TokenKey {
-  public:
-    /// Throws Failure (EX_CONFIG) if the URI names no such key; EX_NOINPUT if the PIN cannot be read.
-    explicit TokenKey(const std::string& uri);
-    ~TokenKey();
-    TokenKey(const TokenKey&) = delete;
-    TokenKey& operator=(const TokenKey&) = delete;
-
-    /// DER of SubjectPublicKeyInfo.
-    foundation::Data publicKey() const;
-
-    /// ECDSA over a digest of 32 bytes, in DER. Throws Failure (EX_IOERR).
-    foundation::Data signDigest(foundation::ByteView digest) const;
-
-  private:
-    struct Session;
-    std::unique_ptr<Session> session_;
-};
+/// Throws Failure (EX_CONFIG) if the URI names no such key, or if this program was built without PKCS #11;
+/// EX_NOINPUT if the PIN cannot be read.
+std::unique_ptr<DigestSigner> openTokenKey(const std::string& uri);
 
 }  // namespace pinwell::lumora

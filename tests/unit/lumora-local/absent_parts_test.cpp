@@ -47,7 +47,7 @@ TEST(WithoutPostgres, NothingMovesToADatabase) {
 
 #if PINWELL_WITHOUT_PKCS11
 TEST(WithoutPkcs11, AKeyInATokenIsRefused) {
-    expectConfigurationFailure([] { startSigningProcess("pkcs11:token=lumora?pin-value=1234"); },
+    expectConfigurationFailure([] { openSigningKey("pkcs11:token=lumora?pin-value=1234", {}); },
                                "cannot use pkcs11:token=lumora: this program was built without PKCS #11");
 }
 #endif
