@@ -13,6 +13,7 @@
 #include <utility>
 
 #include "foundation/format.h"
+#include "foundation/markup.h"
 
 namespace pinwell::batch {
 namespace {
@@ -69,29 +70,6 @@ Result<std::string> placeOfReport(const std::string& path) {
 
 }  // namespace
 
-std::string escapedForXml(const std::string& text) {
-    std::string escaped;
-    for (const char c : foundation::escapeForTerminal(text)) {
-        switch (c) {
-            case '&':
-                escaped += "&amp;";
-                break;
-            case '<':
-                escaped += "&lt;";
-                break;
-            case '>':
-                escaped += "&gt;";
-                break;
-            case '"':
-                escaped += "&quot;";
-                break;
-            default:
-                escaped += c;
-        }
-    }
-    return escaped;
-}
-
 Result<JUnitReport> JUnitReport::begin(const std::string& name) {
     const auto place = placeOfReport(name);
     if (!place) return place.error();
@@ -120,7 +98,8 @@ JUnitReport::~JUnitReport() {
 
 void JUnitReport::add(const Report& report) {
     std::string text = "<testcase classname=\"pinwell." + std::string(report.operation) + "\" name=\"" +
-                       escapedForXml(report.path) + "\" time=\"" + secondsText(report.seconds) + "\"";
+                       foundation::markupText(report.path) + "\" time=\"" + secondsText(report.seconds) +
+                       "\"";
     if (report.cause == Cause::worked) {
         write(text + "/>\n");
         return;
@@ -129,7 +108,7 @@ void JUnitReport::add(const Report& report) {
     const char* const element = isVerdict(report.cause) ? "failure" : "error";
     text += std::string(">\n<") + element + " type=\"" + std::string(nameOf(report.cause)) + "\" message=\"" +
             std::string(nameOf(report.cause)) + ": exit status " + std::to_string(report.exitStatus) + "\">";
-    for (const std::string& message : report.messages) text += escapedForXml(message) + "\n";
+    for (const std::string& message : report.messages) text += foundation::markupText(message) + "\n";
     write(text + "</" + element + ">\n</testcase>\n");
 }
 

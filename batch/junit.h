@@ -41,8 +41,4 @@ class JUnitReport {
     int failure_ = 0;  // errno of the first write that failed
 };
 
-/// Escapes text for XML 1.0, for an attribute or between tags. Control characters are escaped as on a
-/// terminal.
-std::string escapedForXml(const std::string& text);
-
 }  // namespace pinwell::batch

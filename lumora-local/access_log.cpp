@@ -2,6 +2,7 @@
 
 #include "foundation/format.h"
 #include "foundation/json.h"
+#include "foundation/markup.h"
 #include "foundation/value.h"
 #include "lumora-local/rfc3339.h"
 
@@ -14,7 +15,17 @@ using foundation::Value;
 
 /// JSON is UTF-8. What a client sends need not be, and control characters drive terminals.
 std::string printable(std::string_view text) {
-    return foundation::escapeForTerminal(text);
+    return foundation::escapeForDisplay(text);
+}
+
+/// In quotes that the text cannot end.
+std::string quoted(std::string_view text) {
+    std::string line = "\"";
+    for (const char c : text) {
+        if (c == '"' || c == '\\') line += '\\';
+        line += c;
+    }
+    return printable(line + '"');
 }
 
 std::string jsonLine(Dictionary members) {
@@ -27,9 +38,10 @@ std::string jsonLine(Dictionary members) {
 std::string describeRequest(const RequestEntry& entry, LogForm form) {
     if (form == LogForm::text) {
         std::string line =
-            foundation::format("%@ %s \"%s %s\" %d %zu %s", entry.time, entry.peer, entry.method,
-                               entry.target, entry.status, entry.size, entry.identifier);
-        if (!entry.client.empty()) line += foundation::format(" \"%@\"", entry.client);
+            foundation::format("%@ %s %s %d %zu %s", entry.time, entry.peer,
+                               quoted(std::string(entry.method) + ' ' + std::string(entry.target)),
+                               entry.status, entry.size, entry.identifier);
+        if (!entry.client.empty()) line += ' ' + quoted(entry.client);
         return line;
     }
     Array records;

@@ -1,6 +1,7 @@
 #include "foundation/base64.h"
 #include "foundation/format.h"
 #include "foundation/json.h"
+#include "foundation/markup.h"
 #include "foundation/value.h"
 #include "lumora-local/admin_routes.h"
 #include "lumora-local/change_request.h"
@@ -39,7 +40,7 @@ auto changing(Work&& work) {
 
 Answer answerOf(const Event& event, Dictionary members, int status) {
     members["record"] = event.record;
-    members["label"] = foundation::escapeForTerminal(event.label);
+    members["label"] = foundation::escapeForDisplay(event.label);
     members["environment"] = toString(event.environment);
     members["action"] = toString(event.action);
     members["event"] = event.hash;

@@ -3,6 +3,7 @@
 
 #include "foundation/format.h"
 #include "foundation/json.h"
+#include "foundation/markup.h"
 #include "foundation/value.h"
 #include "lumora-local/admin_routes.h"
 #include "lumora-local/code_hash.h"
@@ -96,7 +97,7 @@ Value asValue(const FoundRecord& found, Environment environment) {
     Array hashes;
     for (const CodeHash& hash : found.record.hashes) hashes.emplace_back(recordName(hash));
     return Dictionary{
-        {"record", found.record.name},          {"label", foundation::escapeForTerminal(found.record.label)},
+        {"record", found.record.name},          {"label", foundation::escapeForDisplay(found.record.label)},
         {"environment", toString(environment)}, {"revoked", found.record.revoked},
         {"asset", found.record.asAsset},        {"signed", toRfc3339(found.record.signedAt)},
         {"hashes", std::move(hashes)},          {"hashesCut", found.hashesCut}};

@@ -6,6 +6,7 @@
 #include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "foundation/json.h"
+#include "foundation/markup.h"
 #include "foundation/value.h"
 #include "lumora-local/failure.h"
 
@@ -78,7 +79,7 @@ Value asValue(const Record& record) {
         hashes.push_back(Dictionary{{"algorithm", hash.algorithm}, {"hash", foundation::toHex(hash.hash)}});
     }
     return Dictionary{{"recordName", record.name},
-                      {"label", foundation::escapeForTerminal(record.label)},
+                      {"label", foundation::escapeForDisplay(record.label)},
                       {"revoked", record.revoked},
                       {"asset", record.asAsset},
                       {"signatureTime", record.signedAt.seconds},
@@ -142,9 +143,9 @@ std::optional<Change> revokeNamed(RecordStore& store, const TicketSigner& signer
 std::string describeRecords(const std::vector<Record>& records) {
     std::string text;
     for (const Record& record : records) {
-        text +=
-            format("%s\t%@\t%s\t%@\t%zu\t%@\n", record.revoked ? "revoked" : "valid", record.name,
-                   record.asAsset ? "asset" : "inline", record.signedAt, record.hashes.size(), record.label);
+        text += format("%s\t%@\t%s\t%@\t%zu\t%s\n", record.revoked ? "revoked" : "valid", record.name,
+                       record.asAsset ? "asset" : "inline", record.signedAt, record.hashes.size(),
+                       foundation::escapeForDisplay(record.label));
     }
     return text;
 }

@@ -5,13 +5,14 @@
 
 #include "foundation/bytes.h"
 #include "foundation/format.h"
+#include "foundation/markup.h"
 #include "lumora-local/rfc3339.h"
 #include "lumora-local/sha256.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::escapeForTerminal;
+using foundation::escapeForDisplay;
 using foundation::format;
 
 constexpr std::array kActions{Action::issued, Action::reissued, Action::revoked, Action::reinstated,
@@ -32,7 +33,7 @@ void append(std::string& text, std::string_view field) {
 }
 
 nlohmann::ordered_json textOrNull(std::string_view text) {
-    return text.empty() ? nlohmann::ordered_json(nullptr) : nlohmann::ordered_json(escapeForTerminal(text));
+    return text.empty() ? nlohmann::ordered_json(nullptr) : nlohmann::ordered_json(escapeForDisplay(text));
 }
 
 }  // namespace
@@ -106,17 +107,22 @@ std::string hashOf(const Event& event) {
     return foundation::toHex(sha256(foundation::asBytes(text)));
 }
 
+bool isBlank(std::string_view comment) {
+    return comment.find_first_not_of(" \t\r\n") == std::string_view::npos;
+}
+
 std::string describeEvent(const Event& event) {
-    return format("%s\t%s\t%@\t%@\t%@\t%s\t%@\n", toRfc3339(event.time), toString(event.action), event.record,
-                  event.actor, event.label, reasonText(event), event.comment);
+    return format("%s\t%s\t%@\t%s\t%s\t%s\t%s\n", toRfc3339(event.time), toString(event.action), event.record,
+                  escapeForDisplay(event.actor), escapeForDisplay(event.label), reasonText(event),
+                  escapeForDisplay(event.comment));
 }
 
 std::string eventAsJson(const Event& event) {
     nlohmann::ordered_json object{{"time", toRfc3339(event.time)},
-                                  {"actor", escapeForTerminal(event.actor)},
+                                  {"actor", escapeForDisplay(event.actor)},
                                   {"action", toString(event.action)},
                                   {"record", textOrNull(event.record)},
-                                  {"label", escapeForTerminal(event.label)},
+                                  {"label", escapeForDisplay(event.label)},
                                   {"reason", textOrNull(reasonText(event))},
                                   {"comment", textOrNull(event.comment)},
                                   {"ticket", textOrNull(event.ticket)},

@@ -58,6 +58,9 @@ struct Event {
     std::string hash;
 };
 
+/// Whether a comment says nothing: there are only blanks in it.
+bool isBlank(std::string_view comment);
+
 /// What stands before the first event: 64 zeros.
 std::string hashBeforeTheFirstEvent();
 

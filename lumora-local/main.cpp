@@ -13,6 +13,7 @@
 #include "companion/version.h"
 #include "foundation/date.h"
 #include "foundation/format.h"
+#include "foundation/markup.h"
 #include "foundation/platform_directory.h"
 #include "foundation/process.h"
 #include "lumora-local/commands.h"
@@ -141,7 +142,7 @@ void runIssue(Arguments& arguments) {
     if (arguments.recordNames.empty() && !arguments.label.empty()) {
         throw Failure(EX_USAGE, "--label goes with --record");
     }
-    if (arguments.reinstates && arguments.comment.empty()) {
+    if (arguments.reinstates && isBlank(arguments.comment)) {
         throw Failure(EX_USAGE, "--reinstate needs --comment TEXT");
     }
     const IssueRequest request{arguments.subjects, arguments.recordNames, arguments.label,
@@ -412,7 +413,7 @@ int main(int argc, char** argv) {
         complain(failure.what());
         return failure.exitStatus();
     } catch (const std::exception& error) {
-        complain(foundation::escapeForTerminal(error.what()));
+        complain(foundation::escapeForDisplay(error.what()));
         return EX_SOFTWARE;
     }
 }

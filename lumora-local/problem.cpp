@@ -2,6 +2,7 @@
 
 #include "foundation/format.h"
 #include "foundation/json.h"
+#include "foundation/markup.h"
 #include "foundation/value.h"
 
 namespace pinwell::lumora {
@@ -52,7 +53,7 @@ Answer problem(int status, std::string_view detail) {
         foundation::serializeJSON(Dictionary{{"type", "about:blank"},
                                              {"title", titleOf(status)},
                                              {"status", status},
-                                             {"detail", foundation::escapeForTerminal(detail)}});
+                                             {"detail", foundation::escapeForDisplay(detail)}});
     answer.body = document ? foundation::toString(*document) : std::string("{}");
     return answer;
 }

@@ -32,9 +32,15 @@ void replaceAll(std::string& text, std::string_view part, std::string_view other
 
 }  // namespace
 
+std::string escapeForDisplay(std::string_view text) {
+    std::string result = escapeForTerminal(text);
+    for (const auto& [mark, name] : kDirections) replaceAll(result, mark, name);
+    return result;
+}
+
 std::string markupText(std::string_view text) {
     std::string result;
-    for (const char c : escapeForTerminal(text)) {
+    for (const char c : escapeForDisplay(text)) {
         switch (c) {
             case '&':
                 result += "&amp;";
@@ -55,8 +61,6 @@ std::string markupText(std::string_view text) {
                 result += c;
         }
     }
-    // A change of direction can make one name look like another.
-    for (const auto& [mark, name] : kDirections) replaceAll(result, mark, name);
     // Two code points that XML forbids, but UTF-8 can encode.
     for (const std::string_view none : {"\xEF\xBF\xBE", "\xEF\xBF\xBF"})
         replaceAll(result, none, "\xEF\xBF\xBD");
