@@ -85,7 +85,7 @@ class PolicyReader {
 
 Policy readPolicyFile(const std::string& path) {
     const foundation::Result<foundation::Data> document = foundation::readSmallFile(path, kMaximumPolicyFile);
-    if (!document) throw PolicyError(format("%@: %@", path, document.error().localizedFailureReason()));
+    if (!document) throw PolicyError(format("%@: %@", path, foundation::whyUnreadable(document.error())));
     PolicyReader reader(path);
     const std::string text = foundation::toString(*document);
     if (const auto line = foundation::lineOfLongTomlKey(text, kMaximumKeyParts))

@@ -82,7 +82,7 @@ class AccessReader {
 Clients readAccessFile(const std::string& path) {
     const foundation::Result<foundation::Data> document = foundation::readSmallFile(path, kMaximumFileSize);
     if (!document) {
-        throw Failure(EX_CONFIG, format("%@: %@", path, document.error().localizedFailureReason()));
+        throw Failure(EX_CONFIG, format("%@: %@", path, foundation::whyUnreadable(document.error())));
     }
     AccessReader reader(path);
     const std::string text = foundation::toString(*document);

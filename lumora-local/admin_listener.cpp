@@ -25,10 +25,6 @@ TlsFiles tlsFilesOf(const ServiceDirectory& directory, const AdminOptions& optio
             options.clientAuthorities};
 }
 
-std::string accessPath(const ServiceDirectory& directory) {
-    return directory.servicePath("access.toml");
-}
-
 std::shared_ptr<const TicketSigner> openSigner(const ServiceDirectory& directory) {
     requireChangesAllowed(directory);
     return std::make_shared<const TicketSigner>(directory.openSigner());
@@ -51,7 +47,7 @@ AdminListener::AdminListener(const ServiceDirectory& directory, AdminOptions opt
       signer_(openSigner(directory)),
       signerSettings_(directory.settings().signer),
       store_(openStore(directory)),
-      access_(accessPath(directory)),
+      access_(directory.accessPath()),
       tls_(tlsFilesOf(directory, options_)),
       listener_(options_.listen),
       rates_(kRequestRate),
@@ -67,18 +63,18 @@ AdminListener::~AdminListener() {
 
 void AdminListener::addRights(sandbox::Confinement& rights, const ServiceDirectory& directory) const {
     const SignerSettings& signer = directory.settings().signer;
-    std::vector<std::string> files{options_.clientAuthorities, accessPath(directory)};
+    std::vector<std::string> files{options_.clientAuthorities, directory.accessPath()};
     files.insert(files.end(), signer.chain.begin(), signer.chain.end());
     if (!isTokenKey(signer.key)) files.push_back(signer.key);
     for (const std::string& path : files) sandbox::append(rights.files, sandbox::fileAndItsLinks(path));
 }
 
-void AdminListener::start(int stopDescriptor, std::size_t connections) {
+void AdminListener::start(int stopDescriptor, std::size_t connections, ServiceCounts& counts) {
     ServerLimits limits;
     limits.workers = kWorkers;
     limits.connections = connections;
     limits.connectionsPerAddress = std::min(kConnectionsPerAddress, connections);
-    server_ = std::make_unique<Server>(service_, tls_, output_.requests, output_.err, limits, form_);
+    server_ = std::make_unique<Server>(service_, tls_, output_.requests, output_.err, limits, form_, &counts);
     thread_ = std::thread([this, stopDescriptor] {
         try {
             server_->run(listener_, stopDescriptor);

@@ -33,8 +33,8 @@ class AdminListener {
     /// Adds what it reads while it runs.
     void addRights(sandbox::Confinement& rights, const ServiceDirectory& directory) const;
 
-    /// Serves, with threads of its own, at most `connections` at once.
-    void start(int stopDescriptor, std::size_t connections);
+    /// Serves, with threads of its own, at most `connections` at once. `counts` must outlive them.
+    void start(int stopDescriptor, std::size_t connections, ServiceCounts& counts);
 
     /// Reads access.toml again. If it cannot be used, the list stays as it was, and the error log says so.
     void reloadAccess();

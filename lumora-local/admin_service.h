@@ -49,6 +49,7 @@ class AdminService final : public HttpService {
     Answer answerBody(const RequestHead& head, std::string_view body) const override;
     Answer refuse(int status, const RequestHead* head) const override;
     Answer refuseForNow(std::string_view reason) const override;
+    RequestKind kindOf(std::string_view) const override { return RequestKind::administration; }
 
   private:
     const AdminRoute& routeOf(const RequestHead& head) const;

@@ -32,7 +32,8 @@ bool hasControlCharacters(std::string_view text) {
 class Members {
   public:
     Members(std::string_view body, std::initializer_list<std::string_view> known) {
-        foundation::Result<Value> document = foundation::parseJSON(foundation::asBytes(body));
+        foundation::Result<Value> document =
+            foundation::parseJSON(foundation::asBytes(body), foundation::EqualKeys::refused);
         if (!document) {
             throw Refused(400, format("the body is not JSON: %@", document.error().localizedDescription()));
         }
@@ -128,7 +129,7 @@ TicketRequest parseTicketRequest(std::string_view body) {
     request.artefact.label = members.text("label", kMaximumLabelBytes);
     request.reinstates = members.flag("reinstate");
     request.comment = members.text("comment", kMaximumCommentBytes);
-    if (request.reinstates && request.comment.empty()) Members::refuse("reinstate", "needs a \"comment\"");
+    if (request.reinstates && isBlank(request.comment)) Members::refuse("reinstate", "needs a \"comment\"");
     return request;
 }
 

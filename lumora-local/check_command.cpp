@@ -8,8 +8,11 @@
 #include <system_error>
 
 #include "foundation/format.h"
+#include "foundation/markup.h"
 #include "foundation/platform_directory.h"
+#include "lumora-local/access_list.h"
 #include "lumora-local/certificate_file.h"
+#include "lumora-local/client_authority.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/history.h"
 #include "lumora-local/key_file.h"
@@ -36,11 +39,17 @@ class Inspection {
         look("ticket signer", [&] { checkSigner(); });
         look("ticket authority's key", [&] { checkAuthorityKeys(); });
         look("server", [&] { checkServer(); });
+        look("administration", [&] { checkAdministration(); });
         look("record store", [&] { checkStore(); });
         return std::move(findings_);
     }
 
   private:
+    static bool exists(const std::string& path) {
+        std::error_code ignored;
+        return std::filesystem::exists(path, ignored);
+    }
+
     void look(const std::string& subject, const std::function<void()>& check) {
         subject_ = subject;
         try {
@@ -104,8 +113,7 @@ class Inspection {
 
     void checkKeyIfThere(const std::string& name, const std::string& certificatePath) {
         const std::string path = directory_.servicePath(name);
-        std::error_code ignored;
-        if (!std::filesystem::exists(path, ignored)) return;
+        if (!exists(path)) return;
         const CertificateHandle certificate = readCertificateFile(certificatePath);
         const KeyHandle key = readKeyFile(path, directory_.settings().passphraseFile);
         const bool fits = X509_check_private_key(certificate.get(), key.get()) == 1;
@@ -136,6 +144,29 @@ class Inspection {
                                                    X509_CHECK_FLAG_NEVER_CHECK_SUBJECT, nullptr) == 1;
         ERR_clear_error();
         require(covered, format("its certificate does not speak for %@", host));
+    }
+
+    /// A service without the administration listener has none of this.
+    void checkAdministration() {
+        const std::string access = directory_.accessPath();
+        const std::string authority = clientAuthorityPath(directory_);
+        if (exists(authority)) {
+            checkKeyIfThere("clients/ca.key", authority);
+            checkAuthority(authority);
+        }
+        if (const auto& admin = directory_.settings().admin) {
+            if (admin->clientAuthorities != authority) checkAuthority(admin->clientAuthorities);
+        } else if (!exists(access)) {
+            return;
+        }
+        const std::size_t clients = readAccessFile(access).size();
+        add(Condition::fine, format("access.toml gives rights to %zu clients", clients));
+    }
+
+    void checkAuthority(const std::string& path) {
+        constexpr std::size_t kMostAuthorities = 64;
+        for (const CertificateHandle& certificate : readCertificateFiles(path, kMostAuthorities))
+            checkDate(nameOf(certificate.get()), certificate.get());
     }
 
     void checkStore() {
@@ -174,7 +205,7 @@ std::string describeFindings(const std::vector<Finding>& findings) {
         const char* word = finding.condition == Condition::fine    ? "ok"
                            : finding.condition == Condition::wrong ? "wrong"
                                                                    : "soon";
-        text += format("%s\t%s\t%s\n", word, finding.subject, foundation::escapeForTerminal(finding.text));
+        text += format("%s\t%s\t%s\n", word, finding.subject, foundation::escapeForDisplay(finding.text));
     }
     return text;
 }

@@ -1,5 +1,5 @@
-// Looking a service over before its clients find out: do keys, certificates, platform directory and store
-// fit, and how long do the certificates last.
+// Looking a service over before its clients find out: do keys, certificates, platform directory, access list
+// and store fit, and how long do the certificates last.
 #pragma once
 
 #include <cstdint>

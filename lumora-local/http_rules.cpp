@@ -43,7 +43,9 @@ std::optional<int> refuseHead(const HttpRequest& request) {
     if (codings == 1 && !boost::beast::iequals(request[http::field::transfer_encoding], "chunked")) {
         return 400;
     }
-    if (request.count(http::field::host) > 1) return 400;  // RFC 9112, 3.2
+    // RFC 9112, 3.2: exactly one, which HTTP/1.0 did not have yet.
+    const auto hosts = request.count(http::field::host);
+    if (hosts > 1 || (hosts == 0 && request.version() == 11)) return 400;
     if (request.target().size() > kMaximumTargetLength) return 414;
     return std::nullopt;
 }

@@ -19,7 +19,7 @@ bool announcesBody(const HttpRequest& request);
 bool expectsContinue(const HttpRequest& request);
 
 /// For heads that no handler may see: an unknown method, a target that is too long, framing that two sides
-/// may read differently (RFC 9112, 6.3).
+/// may read differently (RFC 9112, 6.3), no host or two of them.
 std::optional<int> refuseHead(const HttpRequest& request);
 
 /// For a request that must bring a body: refused unless it says where the body ends.

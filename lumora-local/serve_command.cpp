@@ -276,7 +276,7 @@ void serve(const ServiceDirectory& directory, const ServeOptions& options, const
                                     reload(directory.path(), tls, metrics, adminListener, output);
                                 }}};
     if (const auto watch = run.watch()) watches.push_back(*watch);
-    if (admin) admin->start(signals.stop.get(), adminConnections);
+    if (admin) admin->start(signals.stop.get(), adminConnections, metrics.counts());
     run.ready(endpoint);
     server.run(listener, signals.stop.get(), watches);
     admin.reset();

@@ -12,9 +12,10 @@
 namespace pinwell::lumora {
 
 /// What a request is about, as far as its target says.
-enum class RequestKind { lookup, asset, health, readiness, other, unreadable };
+enum class RequestKind { lookup, asset, health, readiness, administration, other, unreadable };
 
-inline constexpr std::array kRequestKindNames{"lookup", "asset", "healthz", "readyz", "other", "unreadable"};
+inline constexpr std::array kRequestKindNames{"lookup",         "asset", "healthz",   "readyz",
+                                              "administration", "other", "unreadable"};
 inline constexpr std::size_t kRequestKinds = kRequestKindNames.size();
 
 /// Statuses that are counted each by itself; all others are counted together.

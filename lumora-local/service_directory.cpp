@@ -51,7 +51,7 @@ Data jsonDocument(const Value& value) {
 }
 
 Value parseJson(const Data& bytes, const std::string& path) {
-    Result<Value> value = foundation::parseJSON(bytes);
+    Result<Value> value = foundation::parseJSON(bytes, foundation::EqualKeys::refused);
     if (!value) throw Failure(EX_CONFIG, format("%@: %@", path, value.error().localizedDescription()));
     return *std::move(value);
 }

@@ -48,6 +48,7 @@ class ServiceDirectory {
     const std::string& path() const noexcept { return path_; }
     std::string platformPath() const { return path_ + "/platform"; }
     std::string storePath() const { return servicePath("records.sqlite"); }
+    std::string accessPath() const { return servicePath("access.toml"); }
     std::string descriptionPath() const { return servicePath("service.json"); }
     std::string rootCertificatePath() const { return servicePath("root.pem"); }
     std::string servicePath(const std::string& name) const { return path_ + "/service/" + name; }

@@ -66,4 +66,9 @@ Result<Data> readSmallFile(const FileDescriptor& file, const std::string& path, 
     }
 }
 
+std::string whyUnreadable(const Error& error) {
+    if (error.code() == EINVAL) return "it is not a regular file";
+    return error.localizedFailureReason();
+}
+
 }  // namespace pinwell::foundation

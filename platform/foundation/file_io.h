@@ -42,4 +42,7 @@ Result<Data> readSmallFile(const std::string& path, std::size_t limit);
 /// The same for an open file, from its position on. Errors name it `path`.
 Result<Data> readSmallFile(const FileDescriptor& file, const std::string& path, std::size_t limit);
 
+/// Why readSmallFile() failed, for people: "it is not a regular file", or as the system calls it.
+std::string whyUnreadable(const Error& error);
+
 }  // namespace pinwell::foundation

@@ -1,5 +1,6 @@
 #include "foundation/json.h"
 #include "foundation/bytes.h"
+#include "foundation/description.h"
 #include "foundation/value.h"
 
 #include <fmt/format.h>
@@ -25,6 +26,8 @@ Error excessive(std::string text) {
 // proportion to its length, and no call stack. Returning false ends the parse.
 class Builder {
   public:
+    explicit Builder(EqualKeys equalKeys) : equalKeys_(equalKeys) {}
+
     bool null() { return add(Value::Null{}); }
     bool boolean(bool flag) { return add(flag); }
     bool number_integer(std::int64_t number) { return add(number); }
@@ -38,6 +41,11 @@ class Builder {
 
     bool start_object(std::size_t) { return open(true); }
     bool key(std::string& name) {
+        if (equalKeys_ == EqualKeys::refused && open_.back().members.contains(name)) {
+            error_ = malformed(fmt::format("An object of the JSON document has the key \"{}\" twice.",
+                                           escapeForTerminal(name)));
+            return false;
+        }
         open_.back().key = std::move(name);
         return true;
     }
@@ -99,6 +107,7 @@ class Builder {
         return true;
     }
 
+    const EqualKeys equalKeys_;
     std::vector<Container> open_;
     std::size_t count_ = 0;
     Value root_;
@@ -139,13 +148,13 @@ Library toLibrary(const Value& value, unsigned depth) {
 
 }  // namespace
 
-Result<Value> parseJSON(ByteView document) {
+Result<Value> parseJSON(ByteView document, EqualKeys equalKeys) {
     if (document.size() > kMaximumJSONSize)
         return excessive(fmt::format("The JSON document is longer than {} bytes.", kMaximumJSONSize));
     // The library treats a zero byte as the end of the text, and would not read the rest.
     if (const auto zero = std::find(document.begin(), document.end(), std::byte{0}); zero != document.end())
         return malformed(fmt::format("The JSON document is malformed at byte {}.", zero - document.begin()));
-    Builder builder;
+    Builder builder(equalKeys);
     Library::sax_parse(document.begin(), document.end(), &builder);
     return std::move(builder).finish();
 }

@@ -16,11 +16,13 @@ inline constexpr unsigned kMaximumJSONDepth = 512;
 inline constexpr std::size_t kMaximumJSONSize = 64 * 1024 * 1024;
 inline constexpr std::size_t kMaximumJSONValues = 1'000'000;
 
+/// What becomes of a key that an object has twice. Readers differ about which one counts.
+enum class EqualKeys { lastWins, refused };
+
 /// The document, whose top level must be an object or an array. UTF-8, one leading byte-order mark allowed,
-/// only white space after it. The last of several equal keys wins. An integer that fits 64 bits stays an
-/// integer; a number that a double cannot hold is an error. The error (kDataErrorDomain) of a malformed
-/// document names the byte position.
-Result<Value> parseJSON(ByteView document);
+/// only white space after it. An integer that fits 64 bits stays an integer; a number that a double cannot
+/// hold is an error. The error (kDataErrorDomain) of a malformed document names the byte position.
+Result<Value> parseJSON(ByteView document, EqualKeys equalKeys = EqualKeys::lastWins);
 
 /// Without pretty-printing; keys in sorted order. Fails for values that JSON cannot express: nil, byte
 /// buffers, dates, URLs, errors, a number that is not finite, text that is not UTF-8, a top level that is not

@@ -1,6 +1,7 @@
 #include "lumora-local/access_list.h"
 
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 
 #include "lumora-local/failure.h"
 #include "support/temporary_directory.h"
@@ -62,6 +63,20 @@ TEST_F(AccessListTest, NamesTheFileAndTheLineOfAFault) {
               path_ + ":3: a client's name has 1 to 64 bytes, as a common name has");
     EXPECT_EQ(faultOf("[client]\n"), path_ + ":1: unknown key \"client\"; there is [clients]");
     EXPECT_EQ(faultOf("clients = 1\n"), path_ + ":1: clients is no table");
+}
+
+TEST_F(AccessListTest, NamesAClientThatIsThereTwice) {
+    EXPECT_EQ(faultOf("[clients]\n\"ci.example\" = [\"read\"]\n\"ci.example\" = [\"issue\"]\n"), "");
+}
+
+TEST_F(AccessListTest, RefusesWhatIsNoRegularFile) {
+    ASSERT_EQ(::mkfifo(path_.c_str(), 0600), 0);
+    try {
+        readAccessFile(path_);
+        FAIL() << "a FIFO was read";
+    } catch (const Failure& failure) {
+        EXPECT_EQ(failure.what(), path_ + ": it is not a regular file");
+    }
 }
 
 TEST_F(AccessListTest, RefusesWhatIsNotAListOfRoles) {

@@ -66,6 +66,13 @@ TEST(TicketBody, IsRefusedIfAMemberIsMissingUnknownOrOfAnotherType) {
     }
 }
 
+/// Whoever checks a request on its way may read the other one.
+TEST(TicketBody, HasEachMemberOnce) {
+    EXPECT_EQ(ticketStatus(with(R"("label":"a","label":"b")")), 400);
+    EXPECT_EQ(ticketStatus(with(R"("label":"a","\u006cabel":"b")")), 400);
+    EXPECT_EQ(revocationStatus(with(R"("comment":"a","comment":"b")")), 400);
+}
+
 TEST(TicketBody, KeepsToItsBounds) {
     const auto label = [](std::size_t size) { return with(R"("label":")" + std::string(size, 'x') + '"'); };
     EXPECT_EQ(ticketStatus(label(kMaximumLabelBytes)), 0);
@@ -99,6 +106,8 @@ TEST(TicketBody, RefusesHashesThatNoTicketListsTogether) {
 
 TEST(TicketBody, NeedsACommentToReinstate) {
     EXPECT_EQ(ticketStatus(with(R"("reinstate":true)")), 422);
+    EXPECT_EQ(ticketStatus(with(R"("reinstate":true,"comment":" \t")")), 422);
+    EXPECT_EQ(ticketStatus(with(R"("reinstate":true,"comment":"   ")")), 422);
     EXPECT_EQ(ticketStatus(with(R"("reinstate":true,"comment":"why")")), 0);
     EXPECT_EQ(ticketStatus(with(R"("reinstate":false)")), 0);
 }

@@ -144,6 +144,11 @@ TEST_F(HostileClient, NamesTwoHosts) {
     expectRefusal(answerTo(lookupHead("Host: localhost\r\n" + length) + "{}"), 400);
 }
 
+TEST_F(HostileClient, NamesNoHost) {
+    expectRefusal(answerTo("GET /healthz HTTP/1.1\r\nConnection: close\r\n\r\n"), 400);
+    EXPECT_EQ(answerTo("GET /healthz HTTP/1.0\r\n\r\n").substr(8, 4), " 200");
+}
+
 TEST_F(HostileClient, CompressesItsBody) {
     expectRefusal(answerTo(lookupHead("Content-Encoding: gzip\r\nContent-Length: 2\r\n") + "{}"), 415);
 }

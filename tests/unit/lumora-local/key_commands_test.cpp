@@ -1,4 +1,5 @@
 // The commands about keys, as a user types them.
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <filesystem>
@@ -11,8 +12,10 @@ namespace {
 
 using pinwell::test::readFile;
 using pinwell::test::TemporaryDirectory;
+using pinwell::test::writeFile;
 using test::Outcome;
 using test::runProgram;
+using testing::HasSubstr;
 
 class KeyCommands : public testing::Test {
   protected:
@@ -80,6 +83,29 @@ TEST_F(KeyCommands, SayWhatTheyFound) {
     EXPECT_NE(bad.out.find("wrong\tserver\t"), std::string::npos) << bad.out;
 }
 
+TEST_F(KeyCommands, CheckTheAccessListAndTheClientAuthority) {
+    init();
+    EXPECT_EQ(runProgram({"check", service_}).out.find("administration"), std::string::npos);
+    ASSERT_EQ(runProgram({"client-certificate", service_, "ci", "--out", directory_ / "ci"}).exitStatus, 0);
+    writeFile(service_ + "/service/access.toml", "[clients]\n\"ci\" = [\"issue\"]\n");
+    const Outcome good = runProgram({"check", service_});
+    EXPECT_EQ(good.exitStatus, 0) << good.out;
+    EXPECT_THAT(good.out, HasSubstr("ok\tadministration\taccess.toml gives rights to 1 clients\n"));
+    EXPECT_THAT(good.out, HasSubstr("ok\tadministration\tLumora Local Clients is valid until 20"));
+
+    writeFile(service_ + "/service/access.toml", "[clients]\n\"ci\" = [\"isue\"]\n");
+    const Outcome fault = runProgram({"check", service_});
+    EXPECT_EQ(fault.exitStatus, 78);
+    EXPECT_THAT(fault.out, HasSubstr("wrong\tadministration\t" + service_ + "/service/access.toml:2: "));
+
+    writeFile(service_ + "/service/access.toml", "[clients]\n\"ci\" = [\"issue\"]\n");
+    std::filesystem::copy_file(service_ + "/service/root.key", service_ + "/service/clients/ca.key",
+                               std::filesystem::copy_options::overwrite_existing);
+    const Outcome foreign = runProgram({"check", service_});
+    EXPECT_EQ(foreign.exitStatus, 78);
+    EXPECT_THAT(foreign.out, HasSubstr("is not the one of the certificate in"));
+}
+
 TEST_F(KeyCommands, PutTheRootAndTheRequestWhereTheyAreTold) {
     init({"--root-out", directory_ / "safe", "--signer-csr", directory_ / "signer.csr"});
     EXPECT_TRUE(std::filesystem::exists(directory_ / "safe/root.key"));
@@ -93,8 +119,7 @@ TEST_F(KeyCommands, PutTheRootAndTheRequestWhereTheyAreTold) {
 
 TEST_F(KeyCommands, AreNotTriedWithSettingsThatHoldAMistake) {
     init();
-    pinwell::test::writeFile(service_ + "/service/service.json",
-                             R"({"hosts":["localhost"],"pasphraseFile":"x"})");
+    writeFile(service_ + "/service/service.json", R"({"hosts":["localhost"],"pasphraseFile":"x"})");
     for (const char* command : {"check", "list", "serve"}) {
         const Outcome outcome = runProgram({command, service_});
         expectFailure(outcome, 78);
