@@ -18,10 +18,16 @@ AdminAnswer toAnswer(const httplib::Result& result) {
     return answer;
 }
 
-pinwell::test::Command serveCommand(const ServiceWithClients& service, const std::string& authorities) {
+pinwell::test::Command serveCommand(const ServiceWithClients& service, const std::string& authorities,
+                                    const std::vector<std::string>& options) {
+    std::vector<std::string> arguments{
+        "serve",          service.path(),
+        "--listen",       "127.0.0.1:0",
+        "--admin-listen", "127.0.0.1:0",
+        "--client-ca",    authorities.empty() ? service.authority() : authorities};
+    arguments.insert(arguments.end(), options.begin(), options.end());
     return {.executable = LUMORA_LOCAL,
-            .arguments = {"serve", service.path(), "--listen", "127.0.0.1:0", "--admin-listen", "127.0.0.1:0",
-                          "--client-ca", authorities.empty() ? service.authority() : authorities},
+            .arguments = std::move(arguments),
             .environment = {{"PATH", "/usr/bin:/bin"}, {"LC_ALL", "C"}}};
 }
 
@@ -62,8 +68,9 @@ ServiceWithClients::ServiceWithClients() : service_(makeService(directory_, "ser
                              "manager = [\"issue\", \"revoke\", \"read\"]\nauditor = [\"read\"]\n");
 }
 
-AdminInstance::AdminInstance(const ServiceWithClients& service, const std::string& authorities)
-    : service_(service), process_(serveCommand(service, authorities)) {
+AdminInstance::AdminInstance(const ServiceWithClients& service, const std::string& authorities,
+                             const std::vector<std::string>& options)
+    : service_(service), process_(serveCommand(service, authorities, options)) {
     const auto admin = process_.waitForLineWith("administration at ");
     const auto ready = process_.waitForLineWith("ready at ");
     if (!admin || !ready) throw std::runtime_error("serve: " + process_.wait().errors);

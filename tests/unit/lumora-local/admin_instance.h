@@ -65,9 +65,10 @@ class ServiceWithClients {
 /// `serve` with both listeners on free loopback ports, until the test ends.
 class AdminInstance {
   public:
-    /// `authorities` is in the place of the service's own, unless it is empty. Throws std::runtime_error if
-    /// it does not start.
-    explicit AdminInstance(const ServiceWithClients& service, const std::string& authorities = "");
+    /// `authorities` is in the place of the service's own, unless it is empty; `options` are further ones of
+    /// the command. Throws std::runtime_error if it does not start.
+    explicit AdminInstance(const ServiceWithClients& service, const std::string& authorities = "",
+                           const std::vector<std::string>& options = {});
 
     int port() const noexcept { return port_; }
     int adminPort() const noexcept { return adminPort_; }

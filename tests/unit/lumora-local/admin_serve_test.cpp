@@ -263,6 +263,23 @@ TEST_F(AdminServeTest, NamesTheClientInTheAccessLog) {
     EXPECT_EQ(all[0].actor, "stranger");
 }
 
+TEST_F(AdminServeTest, CountsItsRequests) {
+    if (!HAS_METRICS) GTEST_SKIP() << "this build is without metrics";
+    AdminInstance instance(service_, "", {"--metrics-listen", "127.0.0.1:0"});
+    EXPECT_EQ(instance.client("stranger").post(kTickets, bodyFor(recordNamed(1))).status, 403);
+    EXPECT_EQ(instance.client("ci.example").post(kTickets, bodyFor(recordNamed(1))).status, 201);
+    const auto line = instance.process().waitForLineWith("metrics at ");
+    ASSERT_TRUE(line);
+    httplib::Client scraper("127.0.0.1", std::stoi(line->substr(line->rfind("127.0.0.1:") + 10)));
+    const auto scraped = scraper.Get("/metrics");
+    ASSERT_TRUE(scraped);
+    for (const char* status : {"201", "403"}) {
+        const std::string sample =
+            std::string("lumora_requests_total{path=\"administration\",status=\"") + status + "\"} 1\n";
+        EXPECT_NE(scraped->body.find(sample), std::string::npos) << scraped->body;
+    }
+}
+
 TEST_F(AdminServeTest, TellsAClientWithTooManyRequestsToWait) {
     AdminInstance instance(service_);
     AdminClient client = instance.client("auditor");
