@@ -2,6 +2,7 @@
 #include <charconv>
 
 #include "foundation/format.h"
+#include "foundation/hex.h"
 #include "foundation/json.h"
 #include "foundation/markup.h"
 #include "foundation/value.h"
@@ -68,7 +69,7 @@ Environment environmentOf(const Query& query) {
 
 Data hashOf(const std::string& text) {
     if (const std::optional<CodeHash> named = parseRecordName(text)) return named->hash;
-    std::optional<Data> bytes = parseHex(text);
+    std::optional<Data> bytes = foundation::parseHex(text);
     if (!bytes || (bytes->size() != hashLength(2) && bytes->size() != hashLength(4)))
         refuse("hash", "is neither 40 nor 96 lower-case hexadecimal digits, nor a record's name");
     return *std::move(bytes);
@@ -76,7 +77,7 @@ Data hashOf(const std::string& text) {
 
 RecordCursor recordCursorIn(const std::string& text) {
     const std::size_t colon = text.find(':');
-    const auto label = parseHex(std::string_view(text).substr(0, std::min(colon, text.size())));
+    const auto label = foundation::parseHex(std::string_view(text).substr(0, std::min(colon, text.size())));
     if (colon == std::string::npos || !label) refuse("after", "is not what a page gave as \"next\"");
     RecordCursor cursor{foundation::toString(*label), text.substr(colon + 1)};
     if (cursor.name.empty() || !isPrintable(cursor.name))

@@ -1,28 +1,8 @@
 #include "lumora-local/code_hash.h"
 
+#include "foundation/hex.h"
+
 namespace pinwell::lumora {
-namespace {
-
-std::optional<unsigned> hexDigit(char c) {
-    if (c >= '0' && c <= '9') return static_cast<unsigned>(c - '0');
-    if (c >= 'a' && c <= 'f') return static_cast<unsigned>(c - 'a') + 10;
-    return std::nullopt;
-}
-
-}  // namespace
-
-std::optional<foundation::Data> parseHex(std::string_view text) {
-    if (text.size() % 2 != 0) return std::nullopt;
-    foundation::Data bytes;
-    for (std::size_t i = 0; i < text.size(); i += 2) {
-        const auto high = hexDigit(text[i]);
-        const auto low = hexDigit(text[i + 1]);
-        if (!high || !low) return std::nullopt;
-        bytes.push_back(static_cast<std::byte>(*high * 16 + *low));
-    }
-    return bytes;
-}
-
 std::optional<std::size_t> hashLength(std::uint32_t algorithm) {
     if (algorithm <= 3) return 20;
     if (algorithm == 4) return 48;
@@ -48,7 +28,7 @@ std::optional<CodeHash> parseRecordName(std::string_view name) {
     }
     const std::optional<std::size_t> length = hashLength(parsed.algorithm);
     if (!length || name.size() != 2 * *length) return std::nullopt;
-    std::optional<foundation::Data> hash = parseHex(name);
+    std::optional<foundation::Data> hash = foundation::parseHex(name);
     if (!hash) return std::nullopt;
     parsed.hash = *std::move(hash);
     return parsed;

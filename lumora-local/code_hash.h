@@ -22,7 +22,4 @@ std::string recordName(const CodeHash& hash);
 /// included).
 std::optional<CodeHash> parseRecordName(std::string_view name);
 
-/// The bytes that lower-case hexadecimal digits give, two a byte. `nullopt` for all other text.
-std::optional<foundation::Data> parseHex(std::string_view text);
-
 }  // namespace pinwell::lumora

@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "foundation/base64.h"
+#include "foundation/hex.h"
 #include "foundation/json.h"
 #include "foundation/value.h"
 #include "src/PWHashedFile/PWHashedFile.h"
@@ -27,24 +28,6 @@ struct Pending {
     Clock::time_point begun;
     std::optional<Clock::time_point> notIssuedSince;
 };
-
-std::optional<std::uint8_t> nibble(char digit) {
-    if (digit >= '0' && digit <= '9') return static_cast<std::uint8_t>(digit - '0');
-    if (digit >= 'a' && digit <= 'f') return static_cast<std::uint8_t>(digit - 'a' + 10);
-    return std::nullopt;
-}
-
-std::optional<foundation::Data> bytesOfHex(std::string_view digits) {
-    if (digits.size() % 2 != 0) return std::nullopt;
-    foundation::Data bytes;
-    for (std::size_t i = 0; i < digits.size(); i += 2) {
-        const auto high = nibble(digits[i]);
-        const auto low = nibble(digits[i + 1]);
-        if (!high || !low) return std::nullopt;
-        bytes.push_back(std::byte(static_cast<std::uint8_t>(*high << 4U | *low)));
-    }
-    return bytes;
-}
 
 void fail(FetchedTicket& result, Cause cause, int status, std::string message) {
     result.cause = cause;
@@ -262,7 +245,7 @@ std::optional<foundation::Data> hashInRecordName(std::string_view name) {
         return std::nullopt;
     }
     if (name.size() < 2 * kShortestHash || name.size() > 2 * kLongestHash) return std::nullopt;
-    return bytesOfHex(name);
+    return foundation::parseHex(name);
 }
 
 void fetchTickets(const std::vector<std::string>& names, const FetchOptions& options,

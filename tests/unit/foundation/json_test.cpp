@@ -60,6 +60,15 @@ TEST(JSON, LetsTheLastOfEqualKeysWin) {
     EXPECT_EQ(parsed(R"({"a":1,"b":2,"a":3})")["a"], Value(3));
 }
 
+TEST(JSON, RefusesEqualKeysIfToldTo) {
+    const auto refused = [](std::string_view text) {
+        return !parseJSON(asBytes(text), EqualKeys::refused);
+    };
+    EXPECT_TRUE(refused(R"({"a":1,"a":2})"));
+    EXPECT_TRUE(refused(R"([{"a":{"b":1,"c":2,"\u0062":1}}])"));
+    EXPECT_FALSE(refused(R"([{"a":{"a":1}},{"a":2}])"));
+}
+
 TEST(JSON, ReadsEscapesInText) {
     EXPECT_EQ(parsed(R"(["\"\\\/\b\f\n\r\t\u00e9\ud83d\udccc"])")[0],
               Value("\"\\/\b\f\n\r\t\xC3\xA9\xF0\x9F\x93\x8C"));
