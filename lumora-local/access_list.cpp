@@ -22,6 +22,13 @@ constexpr std::size_t kMaximumClients = 10'000;
 constexpr std::size_t kMaximumNameLength = 64;  // RFC 5280, appendix A: ub-common-name
 constexpr unsigned kMaximumKeyParts = 4;
 
+std::string describe(const toml::parse_error& error) {
+    // The parser garbles a quoted key, as clients' names are, that is there twice.
+    if (error.description().find("cannot redefine") != std::string_view::npos)
+        return "a client is there twice";
+    return std::string(error.description());
+}
+
 class AccessReader {
   public:
     explicit AccessReader(const std::string& path) : path_(path) {}
@@ -90,7 +97,7 @@ Clients readAccessFile(const std::string& path) {
         throw Failure(EX_CONFIG, format("%@:%u: a key of more than %u parts", path, *line, kMaximumKeyParts));
     }
     const toml::parse_result parsed = toml::parse(std::string_view(text), path);
-    if (!parsed) reader.refuse(parsed.error().source(), std::string(parsed.error().description()));
+    if (!parsed) reader.refuse(parsed.error().source(), describe(parsed.error()));
     return reader.read(parsed.table());
 }
 

@@ -1,4 +1,4 @@
-// // A check of TOML documents before they are parsed.
+// A check of TOML documents before they are parsed.
 #pragma once
 
 #include <optional>

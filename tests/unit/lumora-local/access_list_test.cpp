@@ -66,7 +66,8 @@ TEST_F(AccessListTest, NamesTheFileAndTheLineOfAFault) {
 }
 
 TEST_F(AccessListTest, NamesAClientThatIsThereTwice) {
-    EXPECT_EQ(faultOf("[clients]\n\"ci.example\" = [\"read\"]\n\"ci.example\" = [\"issue\"]\n"), "");
+    EXPECT_EQ(faultOf("[clients]\n\"ci.example\" = [\"read\"]\n\"ci.example\" = [\"issue\"]\n"),
+              path_ + ":3: a client is there twice");
 }
 
 TEST_F(AccessListTest, RefusesWhatIsNoRegularFile) {

@@ -169,7 +169,7 @@ TEST_F(HostileClient, SendsSeveralRequestsAtOnce) {
     const std::string body = R"({"records":[{"recordName":"a"}]})";
     const std::string request = lookupHead("Content-Length: " + std::to_string(body.size()) + "\r\n") + body;
     const std::string answer = answerTo(request + "GET /healthz HTTP/1.1\r\nHost: x\r\n\r\n" +
-                                        "GET /nothing HTTP/1.1\r\nConnection: close\r\n\r\n");
+                                        "GET /nothing HTTP/1.1\r\nHost: x\r\nConnection: close\r\n\r\n");
     const std::size_t first = answer.find("Record not found");
     const std::size_t second = answer.find("\"status\":\"ok\"");
     const std::size_t third = answer.find("HTTP/1.1 404");
