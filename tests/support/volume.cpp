@@ -12,6 +12,8 @@
 namespace pinwell::test {
 namespace {
 
+using namespace std::string_view_literals;
+
 bool runs(const std::string& command) {
     return std::system((command + " >/dev/null 2>&1").c_str()) == 0;  // NOLINT: a test's own fixed commands
 }
@@ -19,6 +21,10 @@ bool runs(const std::string& command) {
 }  // namespace
 
 Volume::Volume(const std::string& fileSystem) : path_(directory_ / "volume") {
+    // NOLINTNEXTLINE(concurrency-mt-unsafe): nothing changes the environment meanwhile
+    if (const char* const kind = std::getenv("PINWELL_TEST_KIND"); kind != nullptr && kind != "volume"sv)
+        throw std::logic_error("a test of the kind \"" + std::string(kind) +
+                               "\" mounts a volume: name it in VOLUMES of its program");
     if (geteuid() != 0) {
         missing_ = "only the superuser may mount volumes";
         return;

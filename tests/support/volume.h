@@ -8,7 +8,8 @@
 
 namespace pinwell::test {
 
-/// A fresh volume, mounted only for this process, and removed at the end of the process at the latest.
+/// A fresh volume, mounted only for this process, and removed at the end of the process at the latest. Throws
+/// if ctest runs the test as one of another kind than "volume" (PINWELL_TEST_KIND in the environment).
 class Volume {
   public:
     /// `fileSystem` gives the command to make it: "xfs", "xfs -m reflink=0", "btrfs", "ext4", or "tmpfs" of
