@@ -1,5 +1,7 @@
 #include "gate_fixture.h"
 
+#include <filesystem>
+
 #include "retrieval/artefact_run.h"
 #include "src/DownloadDelegate.h"
 #include "src/messages.h"
@@ -9,6 +11,7 @@ namespace pinwell::test {
 
 GateTest::GateTest() {
     verboseLevel = kVerbosityQuiet;
+    std::filesystem::create_directory(directory / "tmp");
     writeFile(directory / "platform/roots/root.pem", chain.root.pem());
 }
 

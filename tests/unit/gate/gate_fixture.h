@@ -44,6 +44,8 @@ class GateTest : public testing::Test {
 
   private:
     const ScopedVariable environment_{"PINWELL_PLATFORM", directory / "platform"};
+    // A staple leaves the ticket and a copy of the signature area there.
+    const ScopedVariable temporary_{"TMPDIR", directory / "tmp"};
     const HostPlatform host_{[](int) {}};
 };
 
