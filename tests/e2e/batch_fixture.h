@@ -63,8 +63,8 @@ class BatchTest : public EndToEndTest {
     void expectWrongUsage(const std::string& program,
                           const std::vector<std::vector<std::string>>& lines) const;
 
-    /// Each line of the output keeps to the schema, by another program's word.
-    void expectValid(const ProcessResult& result, const std::string& schema) const;
+    /// Each line of the output keeps to the schema (expectConforms).
+    static void expectValid(const ProcessResult& result, const std::string& schema);
 
     static bool isStapled(const Artefact& artefact, const Data& ticket);
     std::size_t countStapled(const std::vector<Artefact>& artefacts) const;

@@ -7,6 +7,7 @@
 
 #include "batch_fixture.h"
 #include "foundation/sanitized.h"
+#include "schema_validation.h"
 
 namespace pinwell::test {
 namespace {
@@ -171,16 +172,14 @@ TEST_F(Batch, JsonKeepsToItsSchemaOnEveryOutcome) {
 }
 
 TEST_F(Batch, TheSchemaRefusesWhatIsNoSuchLine) {
-    for (const char* line : {"{}", R"({"summary":{}})", R"({"path":"a","cause":"worked"})", "[]"}) {
-        const std::string file = directory / "line.json";
-        writeFile(file, line);
-        for (const char* schema : {BATCH_SCHEMA, TICKET_SCHEMA}) {
-            const ProcessResult judged =
-                runProcess({.executable = JSONSCHEMA_PROGRAM,
-                            .arguments = {"-i", file, schema},
-                            .environment = {{"PATH", "/usr/bin:/bin"}, {"LC_ALL", "C.UTF-8"}}});
-            EXPECT_EQ(judged.exitStatus, 1) << line << schema;
-        }
+    const std::map<std::string, std::string> lines{{"nothing", "{}"},
+                                                   {"summary", R"({"summary":{}})"},
+                                                   {"artefact", R"({"path":"a","cause":"worked"})"},
+                                                   {"list", "[]"}};
+    for (const char* const schema : {BATCH_SCHEMA, TICKET_SCHEMA}) {
+        const std::string refusals = refusalsOf(lines, schema);
+        for (const auto& [name, line] : lines)
+            EXPECT_THAT(refusals, testing::HasSubstr(refusalOf(name))) << line << schema;
     }
 }
 

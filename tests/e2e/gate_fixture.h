@@ -1,8 +1,6 @@
 // Runs of pinwell-gate over samples of a real record service, stapled by the real tool.
 #pragma once
 
-#include <csignal>
-#include <stdexcept>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -13,29 +11,16 @@ namespace pinwell::test {
 
 class GateRun : public LocalServiceTest {
   protected:
-    void SetUp() override {
-        record("issue", samples);
-        serveRecords();
-        for (const std::string& path : samples) ASSERT_EQ(pinwell({"staple", path}).exitStatus, 0) << path;
-    }
+    /// The samples are stapled, and a service with their records runs. It is the same for all tests of a
+    /// process: a test that changes records, or ends the service, starts one of its own (serveRecords).
+    void SetUp() override;
 
-    Command gateCommand(std::vector<std::string> arguments) const {
-        Command made = command(std::move(arguments));
-        made.executable = PINWELL_GATE_PROGRAM;
-        return made;
-    }
-    ProcessResult gate(std::vector<std::string> arguments) const {
-        return runProcess(gateCommand(std::move(arguments)));
-    }
-    ProcessResult gate(std::vector<std::string> arguments, const std::vector<std::string>& paths) const {
-        arguments.insert(arguments.end(), paths.begin(), paths.end());
-        return gate(std::move(arguments));
-    }
+    Command gateCommand(std::vector<std::string> arguments) const;
+    ProcessResult gate(std::vector<std::string> arguments) const;
+    ProcessResult gate(std::vector<std::string> arguments, const std::vector<std::string>& paths) const;
 
-    void stopService() const {
-        serving->sendSignal(SIGTERM);
-        EXPECT_EQ(serving->wait().exitStatus, 0);
-    }
+    /// Ends the test's own service.
+    void stopService() const;
 
     const std::string& application() const { return samples.at(0); }
     const std::string& image() const { return samples.at(1); }
@@ -44,10 +29,6 @@ class GateRun : public LocalServiceTest {
 };
 
 /// Changes a bit of one byte of a file.
-inline void flip(const std::string& path, std::size_t at) {
-    std::string contents = readFile(path);
-    contents.at(at) = static_cast<char>(contents.at(at) ^ 1);
-    writeFile(path, std::string_view(contents));
-}
+void flip(const std::string& path, std::size_t at);
 
 }  // namespace pinwell::test

@@ -9,6 +9,7 @@
 #include <array>
 #include <atomic>
 #include <filesystem>
+#include <stdexcept>
 #include <thread>
 
 #include "browser.h"

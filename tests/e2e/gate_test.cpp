@@ -2,6 +2,7 @@
 #include <filesystem>
 #include <functional>
 #include <ostream>
+#include <stdexcept>
 
 #include "gate_fixture.h"
 #include "support/file_properties.h"
@@ -281,6 +282,7 @@ TEST_F(Gate, EndsWith65WithoutATicket) {
 }
 
 TEST_F(Gate, EndsWith77OnlineForWhatWasRevoked) {
+    serveRecords();
     for (const std::string& path : samples) {
         record("revoke", {path});
         EXPECT_EQ(gate({"--offline", path}).exitStatus, 0) << path;
@@ -291,6 +293,7 @@ TEST_F(Gate, EndsWith77OnlineForWhatWasRevoked) {
 }
 
 TEST_F(Gate, EndsWith68IfTheServiceCannotBeReached) {
+    serveRecords();
     stopService();
     for (const std::string& path : samples) {
         EXPECT_EQ(gate({"--online", path}).exitStatus, 68) << path;
@@ -362,6 +365,7 @@ TEST_F(Gate, EndsWith66ForWhatIsNoArtefact) {
 }
 
 TEST_F(Gate, OfSeveralPathsTheWorstDecides) {
+    serveRecords();
     record("revoke", {package()});
     flip(unsignedImage(), 100);
     const std::string missing = directory / "missing";

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <set>
+#include <string>
 #include <string_view>
 
 #include "support/environment.h"
@@ -75,6 +76,8 @@ TEST(SafeFileName, IsNotEmptyNorTooLongNorADirectory) {
 TEST(SafeFileName, HoldsNeitherSlashNorControlCharacter) {
     EXPECT_FALSE(isSafeFileName("a/b"));
     EXPECT_FALSE(isSafeFileName("/"));
+    for (char control = 1; control < 0x20; ++control)
+        EXPECT_FALSE(isSafeFileName("a" + std::string(1, control) + "b")) << int{control};
     EXPECT_FALSE(isSafeFileName("a\n"));
     EXPECT_FALSE(isSafeFileName("\x1B"));
     EXPECT_FALSE(isSafeFileName("\x7F"));
