@@ -78,7 +78,7 @@ TEST(MeasuredRead, SeesTimeMemoryAndTheResult) {
     }
 }
 
-TEST(MeasuredRead, SeesWhatEndsTheReader) {
+TEST(MeasuredRead, ReportsTheCauseOfTheReadersEnd) {
     EXPECT_EQ(
         measureRead([](const Data&) -> bool { throw std::runtime_error("thrown"); }, fiveBytes(), 1, kLimit)
             .failure,

@@ -65,7 +65,7 @@ TEST_F(Acceptance, TheAlgorithmOfATwentyByteEntryDoesNotMatter) {
     EXPECT_THAT(stapleTicket(sealed(TicketPayloadBuilder().version(1).entry(0, hash))), Worked());
 }
 
-TEST_F(Acceptance, AnEntryThatCannotBeReadIsPassedOver) {
+TEST_F(Acceptance, AnUnreadableEntryIsSkipped) {
     for (const std::uint8_t algorithm : std::initializer_list<std::uint8_t>{0, 4, 5, 255}) {
         EXPECT_THAT(stapleTicket(sealed(TicketPayloadBuilder().entry(algorithm, hash))), Refused())
             << int{algorithm};
@@ -146,7 +146,7 @@ TEST_F(Acceptance, LengthsBeyondTheTicketAreRefused) {
 
 // Revocation.
 
-TEST_F(Acceptance, ARevokedTicketIsSaidSoInsteadOfTheActionsOutcome) {
+TEST_F(Acceptance, ARevokedTicketIsReportedInsteadOfTheActionsOutcome) {
     EXPECT_THAT(stapleTicket(revokedTicket()), RefusedAsRevoked());
     EXPECT_EQ(stapled(), std::nullopt);
 }

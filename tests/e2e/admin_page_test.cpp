@@ -231,7 +231,7 @@ TEST_P(EachAdminPage, HasItsStyleAndFitsANarrowScreen) {
                 AllOf(StartsWith("0px "), HasSubstr(", fits, 0 small")));
 }
 
-TEST_P(EachAdminPage, ShowsWhatHasTheFocusAndReachesAllOfItInOrder) {
+TEST_P(EachAdminPage, ShowsTheFocusAndReachesEveryElementInOrder) {
     const std::string target = targetOf(GetParam());
     bridge->add(
         "<script>addEventListener('load', () => { const all = "

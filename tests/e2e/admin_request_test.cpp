@@ -62,7 +62,7 @@ TEST_F(AdminRequest, GetsTicketsThatStapleAndValidate) {
     EXPECT_THAT(request("ci.example", {"--json", samples[0]}).output, HasSubstr(R"("action":"reissued")"));
 }
 
-TEST_F(AdminRequest, AsksForTheHashesThatTheServiceWouldHaveFound) {
+TEST_F(AdminRequest, RequestsTheHashesThatTheServiceWouldHaveFound) {
     ASSERT_EQ(request("ci.example", samples).exitStatus, 0);
     const std::string requested = hashes();
     record("issue", samples);
@@ -78,7 +78,7 @@ TEST_F(AdminRequest, OfAClientWithoutTheRoleIsRefusedAndNoted) {
     EXPECT_THAT(log(), ElementsAre("reader.example refused"));
 }
 
-TEST_F(AdminRequest, BringsARevokedRecordBackOnlyForWhoMayRevoke) {
+TEST_F(AdminRequest, ReinstatesARevokedRecordOnlyForAClientThatMayRevoke) {
     ASSERT_EQ(request("ci.example", {samples[0]}).exitStatus, 0);
     record("revoke", {samples[0]});
     const ProcessResult plain = request("ci.example", {samples[0]});

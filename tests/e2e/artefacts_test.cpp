@@ -184,7 +184,7 @@ TEST_F(Package, KeepsAnUnknownTrailerInFrontOfTheTicket) {
               package().terminator().unknown("ABC").ticket(text(ticket)).build());
 }
 
-TEST_F(Package, MovesAnUnknownTrailerFromBehindTheTicketToItsFront) {
+TEST_F(Package, MovesAnUnknownTrailerFromAfterTheTicketToBeforeIt) {
     EXPECT_EQ(stapled(package().terminator().ticket("THE OLD TICKET").unknown("ABC")),
               package().terminator().unknown("ABC").ticket(text(ticket)).build());
 }

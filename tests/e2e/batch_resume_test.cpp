@@ -109,7 +109,7 @@ class BatchResume : public BatchTest {
 
 // Completed artefacts, and artefacts that are done again.
 
-TEST_F(BatchResume, WhatIsDoneIsNotDoneAgain) {
+TEST_F(BatchResume, ADoneArtefactIsNotDoneAgain) {
     const auto images = writeImages(5);
     serveRecords();
     EXPECT_EQ(resume(images).exitStatus, 0);
@@ -121,7 +121,7 @@ TEST_F(BatchResume, WhatIsDoneIsNotDoneAgain) {
     EXPECT_THAT(askedFor(), IsEmpty());
 }
 
-TEST_F(BatchResume, WhatIsDoneIsKnownByAnyNameOfItsPath) {
+TEST_F(BatchResume, ADoneArtefactIsKnownByAnyNameOfItsPath) {
     const auto images = writeImages(1);
     std::filesystem::create_directory_symlink(directory / "builds/many", directory / "builds/link");
     serveRecords();
@@ -130,7 +130,7 @@ TEST_F(BatchResume, WhatIsDoneIsKnownByAnyNameOfItsPath) {
     EXPECT_EQ(resumedOf(batch({"staple", "--json", "--resume", journal, "./many/../many/Image0.dmg"})), 1U);
 }
 
-TEST_F(BatchResume, WhatWasRebuiltIsDoneAgain) {
+TEST_F(BatchResume, ARebuiltArtefactIsDoneAgain) {
     auto images = writeImages(3);
     serveRecords();
     ASSERT_EQ(resume(images).exitStatus, 0);
@@ -144,7 +144,7 @@ TEST_F(BatchResume, WhatWasRebuiltIsDoneAgain) {
     EXPECT_TRUE(isStapled(images[1], issuedFor(images[1])));
 }
 
-TEST_F(BatchResume, WhatWasRebuiltWithTheSameLengthAndTimeIsDoneAgain) {
+TEST_F(BatchResume, AnArtefactRebuiltWithTheSameLengthAndTimeIsDoneAgain) {
     auto images = writeImages(1);
     serveRecords();
     ASSERT_EQ(resume(images).exitStatus, 0);
@@ -161,7 +161,7 @@ TEST_F(BatchResume, WhatWasRebuiltWithTheSameLengthAndTimeIsDoneAgain) {
 }
 
 // The hash that a signature states does not cover all of the artefact.
-TEST_F(BatchResume, WhatWasChangedWithTheSameLengthTimeAndStatedHashIsDoneAgain) {
+TEST_F(BatchResume, AnArtefactChangedWithTheSameLengthTimeAndStatedHashIsDoneAgain) {
     std::vector<Artefact> artefacts;
     for (const Artefact& one : {signedImage(), signedPackage(), signedBundle()}) {
         artefacts.push_back(writeArtefact(one, directory / ("builds/" + one.name)));
@@ -190,7 +190,7 @@ TEST_F(BatchResume, ABundleWhoseTicketIsGoneIsDoneAgain) {
     EXPECT_EQ(countStapled(bundles), 2U);
 }
 
-TEST_F(BatchResume, WhatFailedIsDoneAgain) {
+TEST_F(BatchResume, AFailedArtefactIsDoneAgain) {
     const auto images = writeImages(4);
     auto ticket = std::exchange(records[recordNameOf(images[2])], std::nullopt);
     serveRecords();
@@ -226,7 +226,7 @@ TEST_F(BatchResume, AValidationThatHasEndedDoesNotHideARevocation) {
 }
 
 // Otherwise an artefact that always fails would let the others keep an old result.
-TEST_F(BatchResume, AValidationHasEndedWhateverItSaysOfTheArtefacts) {
+TEST_F(BatchResume, AValidationHasEndedWhateverItsVerdicts) {
     const auto images = writeImages(2);
     serveRecords();
     ASSERT_EQ(batch({"staple", "-q"}, {images[0]}).exitStatus, 0);
@@ -281,7 +281,7 @@ TEST_F(BatchResume, NamesOfAnyShapeAreKept) {
 
 // Journals that are none, or damaged.
 
-TEST_F(BatchResume, WhatIsNoJournalIsRefusedAndLeftAlone) {
+TEST_F(BatchResume, AFileThatIsNoJournalIsRefusedAndUnchanged) {
     const auto images = writeImages(1);
     serveRecords();
     for (const std::string& contents : {std::string("a text\n"), std::string("pinwell-batch journal 2\n"),
@@ -336,7 +336,7 @@ TEST_F(BatchResume, ALineThatWasCutShortDoesNotSpoilTheNext) {
     }
 }
 
-TEST_F(BatchResume, AJournalThatCannotBeWrittenIsSaidOnce) {
+TEST_F(BatchResume, AnUnwritableJournalIsReportedOnce) {
     const auto images = writeImages(60);
     serveRecords();
     ASSERT_EQ(batch({"staple", "-q"}, images).exitStatus, 0);
@@ -442,7 +442,7 @@ class BatchSignal : public BatchResume, public testing::WithParamInterface<std::
     int status() const { return GetParam().second; }
 };
 
-TEST_P(BatchSignal, EndsWhatWaitsForTheService) {
+TEST_P(BatchSignal, EndsArtefactsThatWaitForTheService) {
     const auto images = writeImages(10);
     const Gate gate;
     for (int i = 0; i < 4; ++i) service().enqueue(Script().readRequest().waitFor(gate));
@@ -508,7 +508,7 @@ TEST_P(BatchSignal, EndsARunThatWaitsForItsList) {
     EXPECT_EQ(summaryOf(result)["worked"].unsignedIntegerValue(), 1U);
 }
 
-TEST_P(BatchSignal, EndsARunWhoseListNobodyWrites) {
+TEST_P(BatchSignal, EndsARunWhoseListHasNoWriter) {
     const std::string list = directory / "builds/list";
     ASSERT_EQ(::mkfifo(list.c_str(), 0600), 0);
     RunningProcess run(batchCommand({"staple", "--from", list, directory / "builds/missing"}));

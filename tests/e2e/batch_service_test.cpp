@@ -98,7 +98,7 @@ class BatchService : public BatchTest {
     }
 };
 
-TEST_F(BatchService, APortThatNobodyListensOnIsUnreachable) {
+TEST_F(BatchService, APortWithoutAListenerIsUnreachable) {
     const auto images = writeImages(2);
     contact("127.0.0.1:1");
     const ProcessResult result = batch({"staple", "--json", "--retries", "1", "--retry-delay", "0"}, images);
@@ -134,7 +134,7 @@ TEST_P(BatchAtABusyService, IsUnreachableIfItStaysSo) {
 INSTANTIATE_TEST_SUITE_P(Status, BatchAtABusyService, testing::Values(429, 502, 503, 504),
                          [](const auto& row) { return std::to_string(row.param); });
 
-TEST_F(BatchService, ComesBackWhenItIsToldTo) {
+TEST_F(BatchService, RetriesAtTheTimeThatTheServiceGives) {
     // Its own delay would be longer than the deadline.
     const auto images = writeImages(2);
     serveFirst(1, {.status = 503, .headers = {{"Retry-After", "0"}}});
@@ -150,7 +150,7 @@ TEST_F(BatchService, ComesBackAtADateThatHasPassed) {
     EXPECT_EQ(batch({"staple", "-q", "--retry-delay", "600", "--deadline", "60"}, images).exitStatus, 0);
 }
 
-TEST_F(BatchService, DoesNotComeBackBeforeItIsToldTo) {
+TEST_F(BatchService, DoesNotRetryBeforeTheTimeThatTheServiceGives) {
     const auto images = writeImages(1);
     serveFirst(1, {.status = 503, .headers = {{"Retry-After", "500"}}});
     const ProcessResult result = batch({"staple", "--json", "--retry-delay", "0", "--deadline", "1"}, images);
@@ -171,7 +171,7 @@ TEST_F(BatchService, ARetryAfterThatIsNeitherNumberNorDateCountsForNothing) {
     }
 }
 
-TEST_F(BatchService, AnotherStatusIsAnAnswerAndNotTriedAgain) {
+TEST_F(BatchService, AnotherStatusIsAResponseAndNotRetried) {
     const auto images = writeImages(1);
     serve({.status = 400, .body = "{}"});
     const ProcessResult result = batch({"staple", "--json", "--retry-delay", "0"}, images);
@@ -181,7 +181,7 @@ TEST_F(BatchService, AnotherStatusIsAnAnswerAndNotTriedAgain) {
 
 // A server that is not the record service.
 
-TEST_F(BatchService, AServerThatIsNotTrustedIsNotTriedAgain) {
+TEST_F(BatchService, AnUntrustedServerIsNotRetried) {
     const auto images = writeImages(1);
     startService(identityOf(ServerChain("127.0.0.1").issue()));
     const ProcessResult result = batch({"staple", "--json", "--retry-delay", "0"}, images);
@@ -218,7 +218,7 @@ struct Grouping {
 
 class BatchWithoutGroups : public BatchTest, public testing::WithParamInterface<Grouping> {};
 
-TEST_P(BatchWithoutGroups, AsksForEachRecordAlone) {
+TEST_P(BatchWithoutGroups, LooksEachRecordUpAlone) {
     const auto images = writeImages(8);
     records[recordNameOf(images[5])] = std::nullopt;
     service().setHandler([this](const RecordedRequest& request) {
@@ -282,7 +282,7 @@ INSTANTIATE_TEST_SUITE_P(Answered, BatchWithoutGroups,
                                                   }}),
                          [](const auto& row) { return row.param.title; });
 
-TEST_F(BatchService, AServiceThatRefusesGroupsIsAskedForEachRecordAlone) {
+TEST_F(BatchService, AServiceThatRefusesGroupsGetsALookupForEachRecord) {
     const auto images = writeImages(6);
     for (const char* refusal : {"{}", "not JSON", R"({"records":7})", R"({"records":[1,2,3,4,5,6]})",
                                 R"({"serverErrorCode":"BAD_REQUEST","reason":"one at a time"})"}) {
@@ -368,7 +368,7 @@ TEST_F(BatchAssets, OfAnotherSizeThanAnnouncedAreNotAcceptable) {
 
 // A silent service.
 
-TEST_F(BatchService, AnArtefactsTimeIsUpThoughTheServiceSaysNothing) {
+TEST_F(BatchService, AnArtefactTimesOutIfTheServiceIsSilent) {
     const auto images = writeImages(3);
     service().enqueue(Script().readRequest().waitFor(Gate()));
     serveRecords();
@@ -377,7 +377,7 @@ TEST_F(BatchService, AnArtefactsTimeIsUpThoughTheServiceSaysNothing) {
     EXPECT_THAT(reportsOf(result), AllOf(SizeIs(3), Contains(Reports("timedOut", 68))));
 }
 
-TEST_F(BatchService, AGroupThatIsNotAnsweredHoldsUpNoOther) {
+TEST_F(BatchService, AGroupWithoutAResponseDoesNotDelayOthers) {
     const auto images = writeImages(250);
     const Gate gate;
     service().enqueue(Script().readRequest().waitFor(gate).close());
@@ -394,7 +394,7 @@ TEST_F(BatchService, AGroupThatIsNotAnsweredHoldsUpNoOther) {
     EXPECT_EQ(countStapled(images), 250U);
 }
 
-TEST_F(BatchService, TheDeadlineEndsWhatWaitsAndWhatHasNotBegun) {
+TEST_F(BatchService, TheDeadlineEndsWaitingAndUnbegunArtefacts) {
     const auto images = writeImages(30);
     for (int i = 0; i < 4; ++i) service().enqueue(Script().readRequest().waitFor(Gate()));
     serveRecords();
@@ -435,7 +435,7 @@ TEST_F(BatchService, WaitsUntilTheTicketIsIssued) {
     EXPECT_EQ(asked, 1U);
 }
 
-TEST_F(BatchService, WaitsNoLongerThanItIsToldTo) {
+TEST_F(BatchService, WaitsNoLongerThanTheGivenTime) {
     const auto images = writeImages(1);
     records[recordNameOf(images[0])] = std::nullopt;
     serveRecords();
@@ -445,7 +445,7 @@ TEST_F(BatchService, WaitsNoLongerThanItIsToldTo) {
     EXPECT_THAT(service().requests(), SizeIs(testing::Ge(2U)));
 }
 
-TEST_F(BatchService, DoesNotWaitForWhatIsRevoked) {
+TEST_F(BatchService, DoesNotWaitForARevokedRecord) {
     const auto images = writeImages(1);
     records[recordNameOf(images[0])] = sealed(images[0].payload().revoked());
     serveRecords();

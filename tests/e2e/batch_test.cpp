@@ -53,7 +53,7 @@ TEST_F(Batch, StaplesEveryKindOfArtefact) {
     EXPECT_EQ(countStapled(artefacts), 4U);
 }
 
-TEST_F(Batch, ValidatesWhatItHasStapled) {
+TEST_F(Batch, ValidatesItsStapledArtefacts) {
     const auto images = writeImages(5);
     serveRecords();
     ASSERT_EQ(batch({"staple"}, images).exitStatus, 0);
@@ -74,7 +74,7 @@ TEST_F(Batch, LooksUpTwoHundredNamesAtMostInOneRequest) {
 
 // Causes and the exit status.
 
-TEST_F(Batch, SaysWhyEachArtefactEndedAsItDid) {
+TEST_F(Batch, ReportsTheCauseOfEachOutcome) {
     const auto expected = writeEveryOutcome();
     serveRecords();
     std::vector<std::string> arguments{"staple", "--json", "--jobs", "1"};
@@ -101,7 +101,7 @@ TEST_F(Batch, AnUnsignedBundleHasNoHash) {
     EXPECT_THAT(service().requests(), IsEmpty());
 }
 
-TEST_F(Batch, AValidationWithoutATicketAsksNobody) {
+TEST_F(Batch, AValidationWithoutATicketSendsNoRequest) {
     const auto images = writeImages(2);
     serveRecords();
     const ProcessResult result = batch({"validate", "--json"}, images);
@@ -171,7 +171,7 @@ TEST_F(Batch, JsonKeepsToItsSchemaOnEveryOutcome) {
     expectValid(run({"staple", "--json", "--deadline", "0"}), BATCH_SCHEMA);
 }
 
-TEST_F(Batch, TheSchemaRefusesWhatIsNoSuchLine) {
+TEST_F(Batch, TheSchemaRefusesOtherLines) {
     const std::map<std::string, std::string> lines{{"nothing", "{}"},
                                                    {"summary", R"({"summary":{}})"},
                                                    {"artefact", R"({"path":"a","cause":"worked"})"},
@@ -183,7 +183,7 @@ TEST_F(Batch, TheSchemaRefusesWhatIsNoSuchLine) {
     }
 }
 
-TEST_F(Batch, VerboseRunsTellAllThatTheToolTells) {
+TEST_F(Batch, VerboseRunsPrintAllMessagesOfTheTool) {
     const auto images = writeImages(1);
     serveRecords();
     const ProcessResult result = batch({"staple", "-v"}, images);
@@ -242,7 +242,7 @@ TEST_F(Batch, TheLastLineOfAListNeedsNoEndAndEmptyOnesAreNone) {
                 AllOf(SizeIs(2), Each(Reports("worked", 0))));
 }
 
-TEST_F(Batch, PathsOfTheLineComeBeforeThoseOfTheList) {
+TEST_F(Batch, PathsOfTheCommandLineComeBeforePathsOfTheList) {
     const auto images = writeImages(2);
     serveRecords();
     const ProcessResult result =
@@ -433,7 +433,7 @@ TEST_F(Batch, HelpAndVersionGoToStandardOutput) {
                 Ended(0, ElementsAre(testing::StartsWith("pinwell-batch 34.0 (commit "))));
 }
 
-TEST_F(Batch, WhatComesAfterTwoDashesIsAPath) {
+TEST_F(Batch, EveryWordAfterTwoDashesIsAPath) {
     writeArtefact(unsignedImage(foundation::toData("dashed")), directory / "builds/--help.dmg");
     const Artefact image = unsignedImage(foundation::toData("dashed"));
     records[recordNameOf(image)] = ticketOf(image);
@@ -485,7 +485,7 @@ TEST_F(Batch, KeepsTicketsAndCopiesWhenAskedToOrWhenSomethingWentWrong) {
     EXPECT_THAT(temporaryFiles(), SizeIs(5));
 }
 
-TEST_F(Batch, ATemporaryDirectoryThatIsNotThereIsSaid) {
+TEST_F(Batch, AMissingTemporaryDirectoryIsReported) {
     environment["TMPDIR"] = directory / "nowhere";
     const ProcessResult result = batch({"staple", bundle});
     EXPECT_EQ(result.exitStatus, 73);

@@ -43,11 +43,11 @@ class CommandLine : public EndToEndTest {
     std::string missing(const std::string& name = "missing") const { return directory / ("builds/" + name); }
 };
 
-TEST_F(CommandLine, NoArgumentsAreAnsweredWithTheUsage) {
+TEST_F(CommandLine, WithoutArgumentsPrintsTheUsage) {
     EXPECT_THAT(pinwell({}), RefusedWithUsage());
 }
 
-TEST_F(CommandLine, ACommandWordAloneIsAnsweredWithTheUsage) {
+TEST_F(CommandLine, ACommandWordAlonePrintsTheUsage) {
     EXPECT_THAT(pinwell({"staple"}), RefusedWithUsage());
     EXPECT_THAT(pinwell({"validate"}), RefusedWithUsage());
 }
@@ -58,7 +58,7 @@ TEST_F(CommandLine, ALoneOptionIsNotScanned) {
     EXPECT_THAT(pinwell({"--nonsense"}), RefusedWithUsage());
 }
 
-TEST_F(CommandLine, AnOptionBeforeTheCommandWordIsAnsweredWithTheUsage) {
+TEST_F(CommandLine, AnOptionBeforeTheCommandWordPrintsTheUsage) {
     EXPECT_THAT(pinwell({"-v", "staple", bundle}), RefusedWithUsage());
     EXPECT_EQ(stapled(), std::nullopt);
 }
@@ -119,7 +119,7 @@ TEST_F(CommandLine, QuietSaysNothingAtAll) {
     EXPECT_EQ(stapled(), foundation::toData(readFile(temporaryPath("REQUEST.ticket"))));
 }
 
-TEST_F(CommandLine, OptionsHoldBehindThePathWhateverTheEnvironmentSays) {
+TEST_F(CommandLine, OptionsAfterThePathCountInEveryEnvironment) {
     environment["POSIXLY_CORRECT"] = "1";
     const ProcessResult result = pinwell({"staple", bundle, "-q", bundle});
     EXPECT_EQ(result.exitStatus, 0);
@@ -150,7 +150,7 @@ TEST_F(CommandLine, WithoutVerboseNoDiagnosticIsShown) {
     EXPECT_THAT(staple(), Ended(0, ElementsAre(processing(), processing(), kWorked)));
 }
 
-TEST_F(CommandLine, ThePathIsTheLastWordWhateverStandsBeforeIt) {
+TEST_F(CommandLine, ThePathIsTheLastWordWhateverIsBeforeIt) {
     EXPECT_THAT(pinwell({"staple", missing(), "another", bundle}),
                 Ended(0, ElementsAre(processing(), processing(), kWorked)));
     EXPECT_THAT(pinwell({"staple", bundle, missing()}),
@@ -164,7 +164,7 @@ TEST_F(CommandLine, AnOptionInTheLastPlaceIsThePathAsWell) {
                 Ended(66, ElementsAre(StartsWith("File " + missing("-v") + " does not exist. "))));
 }
 
-TEST_F(CommandLine, BehindADoubleDashNothingIsAnOption) {
+TEST_F(CommandLine, AfterADoubleDashNothingIsAnOption) {
     EXPECT_THAT(pinwell({"staple", "--", "-q", bundle}),
                 Ended(0, ElementsAre(processing(), processing(), kWorked)));
 }
@@ -188,7 +188,7 @@ TEST_F(CommandLine, ARelativePathFromADirectoryThatWasRemovedLeadsToNoOtherFile)
     EXPECT_NE(stapled(), std::nullopt);
 }
 
-TEST_F(CommandLine, APathThatDoesNotExistIsSaidSoOnce) {
+TEST_F(CommandLine, AMissingPathIsReportedOnce) {
     EXPECT_THAT(pinwell({"staple", missing()}),
                 Ended(66, ElementsAre("File " + missing() +
                                       " does not exist. Error Domain=POSIXErrorDomain Code=2 "
@@ -214,11 +214,11 @@ TEST_F(CommandLine, APathCannotDriveTheTerminal) {
         Ended(66, ElementsAre(StartsWith("File " + missing("\\x1b]0;title\\x07\\n") + " does not exist. "))));
 }
 
-TEST_F(CommandLine, TheExecutableSaysWhatVersionItIs) {
+TEST_F(CommandLine, TheExecutableContainsItsVersion) {
     EXPECT_THAT(readFile(PINWELL_PROGRAM), testing::HasSubstr("@(#)PROGRAM:pinwell  PROJECT:pinwell-34\n"));
 }
 
-TEST_F(CommandLine, AVerboseRunTellsEveryStepInOrder) {
+TEST_F(CommandLine, AVerboseRunPrintsEveryStepInOrder) {
     const ProcessResult result = pinwell({"staple", "-v", bundle});
     ASSERT_EQ(result.exitStatus, 0);
     std::vector<std::string> steps;  // dictionaries take more than one line; their members are indented

@@ -98,7 +98,7 @@ class Intruded : public LocalServiceTest {
 using ConfinedParser = Intruded;
 
 // Without confinement, the attempts succeed.
-TEST_F(ConfinedParser, IsWhatKeepsTheIntruderFromIt) {
+TEST_F(ConfinedParser, IsTheReasonWhyTheIntruderFails) {
     issueAndServe();
     Command run = intruded(command({"staple", application()}), "attempts");
     run.environment["LD_PRELOAD"] += std::string(":") + KERNEL_WITHOUT_LIBRARY;
@@ -238,7 +238,7 @@ class KernelWithoutConfinement : public Intruded {
     static constexpr const char* kNoSeccomp = "seccomp is not in force: the kernel refuses it";
 };
 
-TEST_F(KernelWithoutConfinement, RunsAsBeforeAndSaysSoIfVerbose) {
+TEST_F(KernelWithoutConfinement, RunsNormallyAndReportsItIfVerbose) {
     issueAndServe();
     const auto noisy = runWithout("landlock seccomp", command({"staple", "-v", application()}));
     EXPECT_EQ(noisy.exitStatus, 0);
@@ -250,7 +250,7 @@ TEST_F(KernelWithoutConfinement, RunsAsBeforeAndSaysSoIfVerbose) {
     EXPECT_THAT(quiet.output, Not(testing::HasSubstr("in force")));
 }
 
-TEST_F(KernelWithoutConfinement, SaysWhichFacilityIsMissing) {
+TEST_F(KernelWithoutConfinement, NamesTheMissingFacility) {
     issueAndServe();
     const auto files = runWithout("landlock", command({"staple", "-v", application()}));
     EXPECT_EQ(files.exitStatus, 0);

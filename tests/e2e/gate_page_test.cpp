@@ -165,7 +165,7 @@ TEST_F(GatePage, GivesEveryCellRoomOnANarrowScreen) {
     EXPECT_THAT(result.output, Not(HasSubstr("<title>0 cells")));
 }
 
-TEST_F(GatePage, RunsNothingAndAsksNobodyWhateverNamesAre) {
+TEST_F(GatePage, RunsNothingAndSendsNoRequestForAnyName) {
     const EmptyServer server;
     const std::string script = "<script>document.title='run'</script>";
     const std::string picture = "<img src=http:\\\\" + server.address() + "\\x>";

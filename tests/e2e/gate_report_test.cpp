@@ -249,7 +249,7 @@ TEST_F(GateReport, IsNotTheStatementAsWell) {
     EXPECT_EQ(gate({"--offline", "-o", "/dev/null", "--attest", "/dev/null", image()}).exitStatus, 0);
 }
 
-TEST_F(GateReport, KeepsTheOneBeforeUntilThereIsANewOne) {
+TEST_F(GateReport, KeepsTheEarlierReportUntilThereIsANewOne) {
     const std::string file = directory / "report";
     writeFile(file, std::string_view("the one before\n"));
     EXPECT_EQ(gate({"--tickets", directory / "none", "-o", file, image()}).exitStatus, 66);

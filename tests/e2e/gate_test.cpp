@@ -31,7 +31,7 @@ class Gate : public GateRun {
 
 // Untouched samples.
 
-TEST_F(Gate, AdmitsWhatWasSignedAndStapled) {
+TEST_F(Gate, AdmitsSignedAndStapledArtefacts) {
     for (const std::string& path : samples)
         for (const char* const how : {"--offline", "--online", "--shallow"})
             EXPECT_THAT(gate({how, path}), Ended(0, testing::ElementsAre(StartsWith(path + ": good."))))
@@ -281,7 +281,7 @@ TEST_F(Gate, EndsWith65WithoutATicket) {
     }
 }
 
-TEST_F(Gate, EndsWith77OnlineForWhatWasRevoked) {
+TEST_F(Gate, EndsWith77OnlineForARevokedArtefact) {
     serveRecords();
     for (const std::string& path : samples) {
         record("revoke", {path});
@@ -327,7 +327,7 @@ TEST_F(Gate, EndsWith78ForAPolicyThatIsWrongAndNamesTheLine) {
     }
 }
 
-TEST_F(Gate, EndsWith65ForWhatThePolicyDoesNotAdmit) {
+TEST_F(Gate, EndsWith65IfThePolicyRefuses) {
     for (const std::vector<std::string>& policy :
          std::vector<std::vector<std::string>>{{"--require-team", "NOSUCHTEAM"},
                                                {"--require-identifier", "org.example.other.*"},
@@ -354,7 +354,7 @@ TEST_F(Gate, JudgesEveryArtefactOfADirectory) {
     EXPECT_EQ(gate({"--offline", "-r", directory / "nothing"}).exitStatus, 66);
 }
 
-TEST_F(Gate, EndsWith66ForWhatIsNoArtefact) {
+TEST_F(Gate, EndsWith66ForAFileThatIsNoArtefact) {
     writeFile(directory / "text", std::string_view("text\n"));
     EXPECT_EQ(gate({"--offline", directory / "text"}).exitStatus, 66);
     EXPECT_EQ(gate({"--offline", directory / "missing"}).exitStatus, 66);

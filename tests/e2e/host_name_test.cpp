@@ -83,7 +83,7 @@ INSTANTIATE_TEST_SUITE_P(
 
 class BadName : public HostNameTest, public testing::WithParamInterface<NameRow> {};
 
-TEST_P(BadName, IsRefusedBeforeAnythingIsAsked) {
+TEST_P(BadName, IsRefusedBeforeAnyRequest) {
     serviceUnder(GetParam().host, identityOf(chainFor(GetParam().presented).issue()))
         .enqueue(answerWithTheTicket());
     EXPECT_THAT(staple(), RefusedFor(GetParam().host));
@@ -147,7 +147,7 @@ TEST_F(HostNameTest, ADotAtTheEndOfBothNamesIsRefusedAllTheSame) {
 
 // The owner of the certificate.
 
-TEST_F(HostNameTest, ATrustedCertificateBehindTheServersOwnHelpsNobody) {
+TEST_F(HostNameTest, ATrustedCertificateAfterTheServersOwnDoesNotCount) {
     const IssuedChain genuine = chainFor("DNS:api.lumora.example").issue();
     ServerChain rogue(kHost);
     rogue.leaf.subject = commonName("Rogue");

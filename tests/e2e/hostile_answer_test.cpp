@@ -54,7 +54,7 @@ class HostileAnswer : public EndToEndTest {
 
 // Informational responses.
 
-TEST_F(HostileAnswer, HundredsOfInformationalAnswersComeBeforeTheAnswer) {
+TEST_F(HostileAnswer, HundredsOfInformationalResponsesComeBeforeTheFinalOne) {
     for (const std::string line : {"100 Continue", "102 Processing", "199 Other"}) {
         std::string many;
         for (int i = 0; i < 300; ++i) many += "HTTP/1.1 " + line + "\r\n\r\n";
@@ -63,19 +63,19 @@ TEST_F(HostileAnswer, HundredsOfInformationalAnswersComeBeforeTheAnswer) {
     }
 }
 
-TEST_F(HostileAnswer, AnInformationalAnswerHasNoBodyWhateverItSays) {
+TEST_F(HostileAnswer, AnInformationalResponseHasNoBodyWhateverItsHead) {
     service().enqueue(Script().readRequest().send("HTTP/1.1 100 Continue\r\nContent-Length: 30\r\n\r\n" +
                                                   answer(record).bytes()));
     EXPECT_THAT(staple(), Worked());
 }
 
-TEST_F(HostileAnswer, InformationalAnswersWithoutEndAreRefused) {
+TEST_F(HostileAnswer, EndlessInformationalResponsesAreRefused) {
     service().enqueue(Script().readRequest().sendEndlessly("HTTP/1.1 100 Continue\r\n\r\n"));
     EXPECT_THAT(staple(), FailedOnTheWay(kTooLarge));
     expectUntouched();
 }
 
-TEST_F(HostileAnswer, AProtocolThatNobodyAskedToSwitchToIsNoAnswer) {
+TEST_F(HostileAnswer, AnUnrequestedProtocolSwitchIsRefused) {
     for (const std::string upgrade : {"h2c", "websocket"}) {
         service().enqueue(Script()
                               .readRequest()
@@ -100,7 +100,7 @@ std::string gzipBomb() {
     return "\x1f\x8b\x08\0\0\0\0\0\0\xff"s + stream.substr(2, stream.size() - 6) + std::string(8, '\0');
 }
 
-TEST_F(HostileAnswer, IsNotAskedToBeCompressed) {
+TEST_F(HostileAnswer, CompressionIsNotRequested) {
     serveAsset(genuine);
     EXPECT_THAT(staple(), Worked());
     ASSERT_EQ(service().requests().size(), 2U);
@@ -286,7 +286,7 @@ TEST_F(HostileAnswer, ASizeOfManyPartsIsNone) {
     expectUntouched();
 }
 
-TEST_F(HostileAnswer, ASizeThatIsNoJSONIsNoAnswer) {
+TEST_F(HostileAnswer, ASizeThatIsNoJSONIsRefused) {
     for (const char* size : {"1e400", "0x10", "+7", "07", "NaN", "Infinity", ".5"})
         EXPECT_THAT(stapleWith(assetRecord(service().url("/${f}"), size)), FoundNoJSON()) << size;
     expectUntouched();
@@ -348,7 +348,7 @@ TEST_F(HostileAnswer, OfTwoMembersOfOneNameTheLastCounts) {
 
 class NoJSON : public HostileAnswer, public testing::WithParamInterface<Row> {};
 
-TEST_P(NoJSON, IsAnAnswerWithoutRecords) {
+TEST_P(NoJSON, IsAResponseWithoutRecords) {
     EXPECT_THAT(stapleWith(GetParam().text), FoundNoJSON());
     expectUntouched();
 }

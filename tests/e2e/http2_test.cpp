@@ -94,7 +94,7 @@ struct Broken {
 
 class BrokenHTTP2 : public HTTP2, public testing::WithParamInterface<Broken> {};
 
-TEST_P(BrokenHTTP2, IsNoAnswer) {
+TEST_P(BrokenHTTP2, IsNoResponse) {
     http2Service().enqueue(afterTheRequest().send(GetParam().frames).close());
     EXPECT_THAT(staple(), FailedOnTheWay(kAnyCode));
     expectUntouched();
@@ -147,7 +147,7 @@ TEST_F(HTTP2, ABlockThatGrowsWhenUnpackedIsRefused) {
     expectUntouched();
 }
 
-TEST_F(HTTP2, PaddingBeyondItsFrameIsNoAnswer) {
+TEST_F(HTTP2, PaddingBeyondItsFrameIsRefused) {
     // The transfer library gives up the connection and passes on the earlier bytes.
     for (const std::string& before : {std::string(), frame(kDataFrame, 0, kOurStream, "{\"records\":")}) {
         http2Service().enqueue(
@@ -178,7 +178,7 @@ TEST_F(HTTP2, ABodyWithoutEndIsRefused) {
     expectUntouched();
 }
 
-TEST_F(HTTP2, FramesWithoutEndAreNoAnswer) {
+TEST_F(HTTP2, EndlessFramesAreRefused) {
     const std::string open = settings() + frame(kHeaders, 0, kOurStream, kStatus200);
     for (const auto& [first, again] :
          {std::pair(open, frame(kContinuation, 0, kOurStream, "\x04\x01z\x01z")),
@@ -211,7 +211,7 @@ TEST_F(HTTP2, AVersionThatWasNotAgreedOnIsNoWayToPassOffACutBody) {
     }
 }
 
-TEST_F(HTTP2, AProtocolThatNobodyOfferedIsNotSpoken) {
+TEST_F(HTTP2, AProtocolWithoutAnOfferIsNotUsed) {
     trust(serverChain.root);
     for (const char* protocol : {"h3", "smtp", "spdy/3"}) {
         startService(identityOf(serverChain), "127.0.0.1", {.applicationProtocol = protocol});

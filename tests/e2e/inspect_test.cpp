@@ -45,7 +45,7 @@ class Inspect : public EndToEndTest {
     }
 };
 
-TEST_F(Inspect, IsContentWithWhatTheToolHasStapled) {
+TEST_F(Inspect, FindsNoFaultInStapledArtefacts) {
     for (const Artefact& one : {signedImage(), unsignedImage(), signedPackage()}) {
         const Artefact written = writeArtefact(one, directory / ("builds/" + one.name));
         serveTicket(sealed(written.payload()));
@@ -61,7 +61,7 @@ TEST_F(Inspect, IsContentWithWhatTheToolHasStapled) {
                 Ended(0, Contains("  The ticket is genuine and is not marked revoked.")));
 }
 
-TEST_F(Inspect, ReadsTheSameFileWhateverSlashesAndDotsArePutBehindItsName) {
+TEST_F(Inspect, ReadsTheSameFileWithAnySlashesAndDotsAfterItsName) {
     const std::vector<std::string> paths = artefacts(true);
     for (const std::string& path : paths)
         for (const char* ending : {"/", "//", "/.", "/./"})
@@ -79,7 +79,7 @@ TEST_F(Inspect, EndsWith65WithoutAGoodTicket) {
                 Ended(65, Contains("  The ticket is genuine, but it does not list this file.")));
 }
 
-TEST_F(Inspect, EndsWith66ForWhatCannotBeInspected) {
+TEST_F(Inspect, EndsWith66IfTheFileCannotBeInspected) {
     EXPECT_THAT(inspect({directory / "builds/missing"}),
                 Ended(66, Contains(StartsWith("  The path cannot be read"))));
     EXPECT_THAT(inspect({directory / "builds"}),
@@ -97,7 +97,7 @@ TEST_F(Inspect, OfSeveralPathsTheWorstDecides) {
                 AllOf(Contains(bundle), Contains(missing), Contains(image.path)));
 }
 
-TEST_F(Inspect, WrongUsageIsToldFromEverythingElse) {
+TEST_F(Inspect, WrongUsageHasItsOwnStatus) {
     for (const std::vector<std::string>& arguments :
          {std::vector<std::string>{}, {"--nonsense"}, {"--json"}, {"--nonsense", bundle}}) {
         const ProcessResult result = inspect(arguments);
@@ -118,7 +118,7 @@ TEST_F(Inspect, AnOutputThatCannotBeWrittenIsAnError) {
     EXPECT_EQ(runProcess(full).exitStatus, 74);
 }
 
-TEST_F(Inspect, AsksNobody) {
+TEST_F(Inspect, SendsNoRequest) {
     const std::vector<std::string> paths = artefacts(true);
     service();
     EXPECT_EQ(inspect(paths).exitStatus, 0);
@@ -181,7 +181,7 @@ TEST_F(Inspect, JsonKeepsToItsSchemaOnEveryOutcome) {
     for (const std::string& line : result.outputLines()) expectConforms(line, INSPECT_SCHEMA);
 }
 
-TEST_F(Inspect, TheSchemaRefusesWhatIsNoSuchObject) {
+TEST_F(Inspect, TheSchemaRefusesOtherObjects) {
     const std::string refusals =
         refusalsOf({{"object", R"({"format":"pinwell-inspect","version":1})"}}, INSPECT_SCHEMA);
     EXPECT_THAT(refusals, testing::HasSubstr(refusalOf("object")));

@@ -84,7 +84,7 @@ TEST_F(LargeTicket, ATemplateWithoutTheTokenIsUsedAsItIs) {
     EXPECT_EQ(service().requests().back().target, "/plain?a=$f");
 }
 
-TEST_F(LargeTicket, ATemplateThatMakesNoURLIsSaidSoAndNoTicketIsFound) {
+TEST_F(LargeTicket, ATemplateThatMakesNoURLIsReportedAndNoTicketIsFound) {
     for (const char* text : {"not a URL", "https://", "${f}", "https://host/%zz", "https://host/a b"}) {
         serveAsset(assetRecord(text, 7), {});
         EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(),
@@ -157,7 +157,7 @@ TEST_F(LargeTicket, OfTheRightSizeMustStillBeGenuine) {
     EXPECT_EQ(stapled(), std::nullopt);
 }
 
-TEST_F(LargeTicket, ThatIsRevokedIsSaidSo) {
+TEST_F(LargeTicket, ThatIsRevokedIsReported) {
     serveAsset(revokedTicket());
     EXPECT_THAT(
         staple(),
@@ -197,7 +197,7 @@ TEST_F(LargeTicket, AHostThatIsNotTrustedParksTheRun) {
     EXPECT_THAT(stranger.requests(), IsEmpty());
 }
 
-TEST_F(LargeTicket, AHostThatDoesNotAnswerParksTheRun) {
+TEST_F(LargeTicket, AHostThatDoesNotRespondParksTheRun) {
     std::string nobody;
     {
         const HostileServer gone(identityOf(serverChain));

@@ -162,7 +162,7 @@ TEST_F(Lookup, APlatformDirectoryThatIsNotThereMeansTheBuiltInHost) {
 
 // Records without a ticket.
 
-TEST_F(Lookup, TellsTheServicesReason) {
+TEST_F(Lookup, PrintsTheServicesReason) {
     EXPECT_THAT(stapleWith(R"({"records":[{"reason":"Record not found","serverErrorCode":"NOT_FOUND"}]})"),
                 FoundNoTicketBecause(failedDueTo("Record not found")));
     expectUntouched();
@@ -190,7 +190,7 @@ TEST_F(Lookup, AnErrorStatusWithAJSONBodyIsReadLikeAnyOther) {
     EXPECT_THAT(staple(), FoundNoTicketBecause(failedDueTo("(null)")));
 }
 
-TEST_F(Lookup, TheStatusOfAnAnswerWithATicketDoesNotMatter) {
+TEST_F(Lookup, TheStatusOfAResponseWithATicketDoesNotMatter) {
     for (const int status : {404, 500, 203}) {
         Response odd = answer(inlineRecord(ticket()));
         odd.status = status;
@@ -199,7 +199,7 @@ TEST_F(Lookup, TheStatusOfAnAnswerWithATicketDoesNotMatter) {
     }
 }
 
-TEST_F(Lookup, ABodyThatIsNotJSONIsAnAnswerWithoutRecords) {
+TEST_F(Lookup, ABodyThatIsNotJSONIsAResponseWithoutRecords) {
     for (const std::string body :
          {"<html>Moved</html>", "{\"records\":", "\"text\"", "7", "null", "\xff\xfe", "{} {}"})
         EXPECT_THAT(stapleWith(body), FoundNoTicketBecause(failedDueTo("(null)"))) << body;
@@ -212,7 +212,7 @@ TEST_F(Lookup, ADocumentNestedBeyondMeasureIsNotJSON) {
                 FoundNoTicketBecause(failedDueTo("(null)")));
 }
 
-TEST_F(Lookup, AnUnexpectedShapeIsSaidSo) {
+TEST_F(Lookup, AnUnexpectedShapeIsReported) {
     for (const char* body : {
              "[]",
              R"({"records":[]})",
@@ -344,7 +344,7 @@ TEST_F(Lookup, NothingIsWrittenThroughALinkInTheTicketFilesPlace) {
 
 // Before the network.
 
-TEST_F(Lookup, AFileWithoutATicketIsNotAskedAboutToValidateIt) {
+TEST_F(Lookup, AFileWithoutATicketIsNotLookedUpToValidateIt) {
     service();
     EXPECT_THAT(validate(),
                 Ended(65, ElementsAre(processing(), "Sample.app does not have a ticket stapled to it.")));

@@ -78,7 +78,7 @@ TEST_F(LocalService, DeliversTicketsAsAssets) {
     EXPECT_THAT(validate(), RefusedAsRevoked());
 }
 
-TEST_F(LocalService, KnowsNothingOfWhatWasNotIssued) {
+TEST_F(LocalService, HasNoRecordWithoutAnIssue) {
     serveRecords();
     EXPECT_THAT(staple(), NotFound(bundle));
     EXPECT_EQ(stapled(), std::nullopt);

@@ -19,7 +19,7 @@ TEST(Process, KeepsTheTwoOutputsApart) {
     EXPECT_EQ(result.errors, "err\n");
 }
 
-TEST(Process, TellsAStatusFromASignal) {
+TEST(Process, DistinguishesAStatusFromASignal) {
     EXPECT_EQ(runProcess(shell("exit 77")).exitStatus, 77);
     const ProcessResult killed = runProcess(shell("kill -TERM $$"));
     EXPECT_EQ(killed.exitStatus, std::nullopt);
@@ -77,11 +77,11 @@ TEST(Process, ALineThatNeverComesIsNothing) {
     EXPECT_THAT(process.wait().outputLines(), ElementsAre("other"));
 }
 
-TEST(Process, WhatCannotBeStartedIsAnError) {
+TEST(Process, AProgramThatCannotBeStartedIsAnError) {
     EXPECT_THROW(runProcess({.executable = "/nowhere/program"}), std::system_error);
 }
 
-TEST(Process, LinesAreWhatStandsBetweenNewlines) {
+TEST(Process, LinesAreTheTextsBetweenNewlines) {
     EXPECT_THAT(linesOf("a\n\nb"), ElementsAre("a", "", "b"));
     EXPECT_THAT(linesOf(""), ElementsAre());
     EXPECT_THAT(linesOf("\n"), ElementsAre(""));

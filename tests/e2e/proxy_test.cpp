@@ -130,7 +130,7 @@ TEST_F(ProxyTest, ThatCannotReachTheServerFailsTheLookup) {
     EXPECT_THAT(staple(), FailedOnTheWay(kProxyFailed));
 }
 
-TEST_F(ProxyTest, ThatAsksForAPasswordIsGivenTheOneOfItsURLAndNoOther) {
+TEST_F(ProxyTest, ThatRequiresAPasswordGetsTheOneOfItsURL) {
     RealProxy proxy(directory, "BasicAuth pinwell secret\n");
     serveTicket(ticket());
     environment["https_proxy"] = proxy.url();
@@ -227,19 +227,19 @@ class LyingProxy : public ProxyTest {
     HostileServer proxy;
 };
 
-TEST_F(LyingProxy, AnswersWithWhatIsNotHTTP) {
+TEST_F(LyingProxy, RespondsWithoutHTTP) {
     for (const std::string& bytes :
          {std::string("SSH-2.0-server\r\n\r\n"), std::string(4096, '\0'), std::string(4096, '\xff'),
           std::string("\x05\x00", 2), std::string("\r\n\r\n"), std::string("HTTP/1.1 abc\r\n\r\n")})
         EXPECT_THAT(stapleAfterAnswer(bytes), FailedOnTheWay(kAnyCode)) << bytes.substr(0, 20);
 }
 
-TEST_F(LyingProxy, AnswersWithAPage) {
+TEST_F(LyingProxy, RespondsWithAPage) {
     EXPECT_THAT(stapleAfterAnswer(Response{.status = 503, .body = "<html>Sorry</html>"}.bytes()),
                 FailedOnTheWay(kProxyFailed));
 }
 
-TEST_F(LyingProxy, AnswersInThePlaceOfTheServer) {
+TEST_F(LyingProxy, RespondsInsteadOfTheServer) {
     // The ticket is genuine, but it did not come from a TLS server.
     EXPECT_THAT(stapleAfterAnswer(answer(inlineRecord(ticket())).bytes()), FailedOnTheWay(kAnyCode));
     EXPECT_THAT(stapleAfterAnswer("HTTP/1.1 200 OK\r\n\r\n" + answer(inlineRecord(ticket())).bytes()),

@@ -118,7 +118,7 @@ TEST_F(TicketRequest, KeepsTheTicketsThatTheServiceIssues) {
     EXPECT_EQ(countStapled(artefacts), 4U);
 }
 
-TEST_F(TicketRequest, SaysWhatTheServiceRefusesAndGoesOn) {
+TEST_F(TicketRequest, ReportsARefusalAndContinues) {
     const auto images = writeImages(2);
     records[recordNameOf(images[0])] = std::nullopt;
     serveTickets();
@@ -139,7 +139,7 @@ TEST_F(TicketRequest, SendsLabelCommentAndReinstatement) {
                       HasSubstr(R"("comment":"built anew")")));
 }
 
-TEST_F(TicketRequest, AsksOnceForArtefactsWithOneRecord) {
+TEST_F(TicketRequest, RequestsOneTicketForArtefactsWithOneRecord) {
     auto images = writeImages(1);
     std::filesystem::copy_file(images[0].path, directory / "builds/Copy.dmg");
     images.push_back(images[0]);
@@ -158,7 +158,7 @@ TEST_F(TicketRequest, ReadsItsPathsFromAList) {
     EXPECT_EQ(request({"--from", directory / "builds/list"}, {}).exitStatus, 64);
 }
 
-TEST_F(TicketRequest, AfterALostAnswerIsTheSameRequest) {
+TEST_F(TicketRequest, RepeatsTheSameRequestAfterALostResponse) {
     const auto images = writeImages(1);
     administration();
     service().enqueue(Script().readRequest().cut());
@@ -219,7 +219,7 @@ TEST_F(TicketRequest, IsNotRedirected) {
     EXPECT_THAT(service().requests(), SizeIs(1));
 }
 
-TEST_F(TicketRequest, SaysThatTheServiceDoesNotKnowTheClient) {
+TEST_F(TicketRequest, ReportsThatTheServiceDoesNotKnowTheClient) {
     const auto images = writeImages(2);
     const IssuedChain stranger = chainFor("stranger.example");
     writeFile(certificate, stranger.serverPem());
@@ -284,7 +284,7 @@ TEST_F(TicketRequest, EndsAtItsDeadlineAndWithASignal) {
     expectValid(result);
 }
 
-TEST_F(TicketRequest, SaysWhatIsWrongWithItsCertificateAndKey) {
+TEST_F(TicketRequest, ReportsTheFaultOfItsCertificateAndKey) {
     const auto images = writeImages(1);
     serveTickets();
     const auto complains = [&](const std::string& words) {

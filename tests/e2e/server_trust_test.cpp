@@ -206,7 +206,7 @@ TEST_F(ServerTrust, ALeafThatTheUserAllowsServesItself) {
     EXPECT_THAT(stapleFrom(ServerIdentity{alone.pem(), alone.key.pem()}), Worked());
 }
 
-TEST_F(ServerTrust, WhatTheUserAllowsMustStillFitThePolicy) {
+TEST_F(ServerTrust, ACertificateThatTheUserAllowsMustStillFitThePolicy) {
     trust(serverChain.root, "user-trust/allow");
     chain.leaf.notAfter = kLongAgo;
     EXPECT_THAT(stapleFrom(chain), RefusedTwice(5, "Record Service", "expired"));

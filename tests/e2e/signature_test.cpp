@@ -66,7 +66,7 @@ TEST_F(Signature, ASignersSignatureNamesTeamAndTime) {
     }
 }
 
-TEST_F(Signature, ATimeThatNobodyVouchesForIsNotShown) {
+TEST_F(Signature, ATimeWithoutATimestampIsNotShown) {
     const Data codeDirectory = signedDirectory().build();
     const Data cms = CmsBuilder(codeDirectory).timestamp(TimestampBuilder().brokenSignature()).build();
     replaceBundle(imageSignedWith(codeDirectory, cms), codeDirectory);

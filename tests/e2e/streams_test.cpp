@@ -32,7 +32,7 @@ class Streams : public EndToEndTest {
     const Data genuine = ticket();
 };
 
-TEST_F(Streams, NobodyReadsStandardOutput) {
+TEST_F(Streams, StandardOutputHasNoReader) {
     Command run = verboseStaple();
     run.output = Output::brokenPipe;
     expectGoodStaple(run);
@@ -105,7 +105,7 @@ TEST_F(Streams, ALargeTicketOnAClosedOutputIsWhole) {
     EXPECT_EQ(stapled(), genuine);
 }
 
-TEST_F(Streams, NobodyReadsTheUsage) {
+TEST_F(Streams, TheUsageHasNoReader) {
     for (const Output errors : {Output::brokenPipe, Output::closed, Output::full}) {
         Command run = command({"stapel", bundle});
         run.errors = errors;

@@ -73,7 +73,7 @@ TEST_F(TicketTool, HashPrintsRecordNamesWithoutANetwork) {
     EXPECT_THAT(service().connections(), IsEmpty());
 }
 
-TEST_F(TicketTool, HashSaysWhatHasNone) {
+TEST_F(TicketTool, HashReportsArtefactsWithoutAHash) {
     const auto images = writeImages(1);
     BundleBuilder().executable(foundation::toData("#!/bin/sh\n")).write(directory / "builds/Unsigned.app");
     writeFile(directory / "builds/plain.txt", "text");
@@ -163,7 +163,7 @@ TEST_F(TicketTool, FetchSaysWhyThereIsNoTicket) {
     EXPECT_THAT(*indexEntries().array(), SizeIs(1));
 }
 
-TEST_F(TicketTool, FetchTellsAServerThatIsUntrustedFromOneThatIsUnreachable) {
+TEST_F(TicketTool, FetchDistinguishesAnUntrustedServerFromAnUnreachableOne) {
     const auto images = writeImages(2);
     service().setHandler([](const RecordedRequest&) { return Response{.status = 503}; });
     const ProcessResult busy =
@@ -225,7 +225,7 @@ TEST_F(TicketTool, FetchEndsWithASignalAndKeepsItsIndex) {
     }
 }
 
-TEST_F(TicketTool, FetchAsksForEachRecordAloneWhereGroupsAreNotAnswered) {
+TEST_F(TicketTool, FetchLooksEachRecordUpAloneIfGroupsGetNoResponse) {
     const auto images = writeImages(4);
     service().setHandler([this](const RecordedRequest& request) {
         auto names = namesIn(request);
@@ -318,7 +318,7 @@ TEST_F(TicketTool, AttachJudgesEachTicket) {
     for (std::size_t i = 1; i < images.size(); ++i) EXPECT_EQ(readFile(images[i].path), images[i].contents);
 }
 
-TEST_F(TicketTool, AttachSaysWhatCannotBeReadOrWritten) {
+TEST_F(TicketTool, AttachReportsUnreadableAndUnwritableArtefacts) {
     const auto images = writeImages(1);
     keepTickets(images);
     EXPECT_EQ(ticketTool({"attach", "--tickets", tickets, "missing.dmg"}).exitStatus, 66);
@@ -375,7 +375,7 @@ TEST_F(TicketTool, ExtractNeverOverwrites) {
     EXPECT_EQ(tool({"extract", "-o", directory / "builds"}, images).exitStatus, 73);
 }
 
-TEST_F(TicketTool, ExtractSaysWhatHasNoTicket) {
+TEST_F(TicketTool, ExtractReportsAnArtefactWithoutATicket) {
     const auto images = writeImages(1);
     EXPECT_THAT(reportsOf(tool({"extract", "--json"}, images)), ElementsAre(Reports("notStapled", 65)));
     EXPECT_EQ(tool({"extract"}, images).exitStatus, 65);
@@ -445,7 +445,7 @@ TEST_F(TicketTool, TrailersOfOthersOutliveARemoveAndKeepATicketOut) {
     EXPECT_THAT(service().requests(), IsEmpty());
 }
 
-TEST_F(TicketTool, RemoveSaysThatATicketStaysWhichIsAllOfItsSignature) {
+TEST_F(TicketTool, RemoveReportsThatATicketStaysIfItIsTheWholeSignature) {
     const auto images = writeImages(1);
     keepTickets(images);
     ASSERT_EQ(tool({"attach", "-q", "--tickets", tickets}, images).exitStatus, 0);
@@ -541,7 +541,7 @@ TEST_F(TicketTool, AnOutputThatIsFullIsAnErrorAndOneThatIsClosedIsNone) {
     }
 }
 
-TEST_F(TicketTool, ATemporaryDirectoryThatIsNotThereIsSaid) {
+TEST_F(TicketTool, AMissingTemporaryDirectoryIsReported) {
     const auto images = writeImages(1);
     environment["TMPDIR"] = directory / "nowhere";
     for (const char* command : {"attach", "remove"}) {

@@ -36,7 +36,7 @@ class Transport : public EndToEndTest {
 
 // Connections.
 
-TEST_F(Transport, NobodyListens) {
+TEST_F(Transport, ThereIsNoListener) {
     std::string host;
     {
         const HostileServer gone(identityOf(serverChain));
@@ -66,7 +66,7 @@ TEST_F(Transport, CutAfterTheRequest) {
     EXPECT_THAT(stapleFrom(Script().readRequest().reset()), FailedOnTheWay(kConnectionLost));
 }
 
-TEST_F(Transport, ClosedInOrderWithoutAnAnswer) {
+TEST_F(Transport, ClosedInOrderWithoutAResponse) {
     EXPECT_THAT(stapleFrom(Script().readRequest().close()), FailedOnTheWay(kConnectionLost));
 }
 
@@ -84,25 +84,25 @@ TEST_F(Transport, CutInTheBody) {
                 FailedOnTheWay(kConnectionLost));
 }
 
-TEST_F(Transport, ABodyOfUnknownLengthThatIsCutIsNoAnswer) {
+TEST_F(Transport, ACutBodyOfUnknownLengthIsRefused) {
     // Without a length, only the orderly end of the connection distinguishes a whole body from a part.
     EXPECT_THAT(stapleFrom(Script().readRequest().send("HTTP/1.1 200 OK\r\n\r\n" + body).cut()),
                 FailedOnTheWay(kConnectionLost));
     EXPECT_THAT(stapleFrom(Script().readRequest().send("HTTP/1.1 200 OK\r\n\r\n" + body).close()), Worked());
 }
 
-TEST_F(Transport, AnAnswerThatIsNotHTTP) {
+TEST_F(Transport, AResponseThatIsNotHTTP) {
     for (const std::string& bytes : {std::string("SSH-2.0-server\r\n\r\n"), "HTTP/0.9\r\n\r\n" + body, body})
         EXPECT_THAT(stapleFrom(Script().readRequest().send(bytes).close()),
                     FailedOnTheWay(kBadServerResponse))
             << bytes.substr(0, 20);
 }
 
-TEST_F(Transport, AnAnswerThatComesByteByByteIsAnAnswer) {
+TEST_F(Transport, AResponseByteByByteIsAccepted) {
     EXPECT_THAT(stapleFrom(Script().readRequest().drip(head + "\r\n" + body)), Worked());
 }
 
-TEST_F(Transport, AnAnswerInChunksIsAnAnswer) {
+TEST_F(Transport, AResponseInChunksIsAccepted) {
     std::string chunks;
     for (std::size_t at = 0; at < body.size(); at += 15)
         chunks += foundation::format("%x\r\n", static_cast<std::uint32_t>(body.substr(at, 15).size())) +
@@ -111,7 +111,7 @@ TEST_F(Transport, AnAnswerInChunksIsAnAnswer) {
     EXPECT_THAT(stapleFrom(Script().readRequest().send(chunkedHead + chunks + "0\r\n\r\n")), Worked());
 }
 
-TEST_F(Transport, AnAnswerWhoseLastChunkIsMissingIsNone) {
+TEST_F(Transport, AResponseWithoutItsLastChunkIsRefused) {
     const std::string chunk = foundation::format("%zx\r\n", body.size()) + body + "\r\n";
     EXPECT_THAT(stapleFrom(Script()
                                .readRequest()
@@ -120,7 +120,7 @@ TEST_F(Transport, AnAnswerWhoseLastChunkIsMissingIsNone) {
                 FailedOnTheWay(kConnectionLost));
 }
 
-TEST_F(Transport, AnAnswerThatDoesNotSayPlainlyWhereItEndsIsRefused) {
+TEST_F(Transport, AResponseWithoutACertainEndIsRefused) {
     for (const std::string fields :
          {"Content-Length: 4\r\nContent-Length: 9\r\n", "Content-Length: -1\r\n", "Content-Length: 4, 9\r\n",
           "Transfer-Encoding: gzip\r\n", "Transfer-Encoding: gzip, chunked\r\n"}) {
@@ -133,11 +133,11 @@ TEST_F(Transport, AnAnswerThatDoesNotSayPlainlyWhereItEndsIsRefused) {
     EXPECT_EQ(service().requests().size(), 5U);
 }
 
-TEST_F(Transport, AnAnswerOfHTTP10IsAnAnswer) {
+TEST_F(Transport, AResponseOfHTTP10IsAccepted) {
     EXPECT_THAT(stapleFrom(Script().readRequest().send("HTTP/1.0 200 OK\r\n\r\n" + body).close()), Worked());
 }
 
-TEST_F(Transport, AnInformationalAnswerComesBeforeTheAnswer) {
+TEST_F(Transport, AnInformationalResponseComesBeforeTheFinalOne) {
     EXPECT_THAT(
         stapleFrom(Script().readRequest().send("HTTP/1.1 103 Early Hints\r\nX-Ostrel-Request-UUID: EARLY\r\n"
                                                "\r\n" +
@@ -179,7 +179,7 @@ TEST_F(Transport, ProxiesForOtherProtocolsAreNotUsed) {
 
 // Responses.
 
-TEST_F(Transport, AQuestionForAPasswordIsAnAnswerLikeAnyOther) {
+TEST_F(Transport, ARequestForAPasswordIsAResponseLikeAnyOther) {
     Response question = answer(body);
     question.status = 401;
     question.headers.emplace_back("WWW-Authenticate", "Basic realm=\"records\"");
@@ -222,7 +222,7 @@ TEST_F(Transport, HeadersCannotDriveTheTerminal) {
     EXPECT_THAT(result.output, testing::Not(HasSubstr("\x1b")));
 }
 
-TEST_F(Transport, AnAnswerThatAnnouncesMoreThanIsReadIsRefusedBeforeItComes) {
+TEST_F(Transport, AResponseThatAnnouncesTooMuchIsRefusedBeforeItsBody) {
     EXPECT_THAT(stapleFrom(Script()
                                .readRequest()
                                .send("HTTP/1.1 200 OK\r\nContent-Length: " +
@@ -231,7 +231,7 @@ TEST_F(Transport, AnAnswerThatAnnouncesMoreThanIsReadIsRefusedBeforeItComes) {
                 FailedOnTheWay(kTooLarge));
 }
 
-TEST_F(Transport, AnAnswerWithoutEndIsRefused) {
+TEST_F(Transport, AnEndlessResponseIsRefused) {
     EXPECT_THAT(stapleFrom(Script()
                                .readRequest()
                                .send("HTTP/1.1 200 OK\r\n\r\n")
@@ -249,7 +249,7 @@ TEST_F(Transport, AHeadWithoutEndIsRefused) {
 
 // Redirects.
 
-TEST_F(Transport, ARedirectIsFollowedAndItsAnswerIsTheAnswer) {
+TEST_F(Transport, ARedirectIsFollowedAndItsResponseCounts) {
     service().enqueue(
         Script().respond({.status = 307, .headers = {{"Location", "/elsewhere"}}, .body = "moved"}));
     service().enqueue(Script().respond(answer(body)));
@@ -315,7 +315,7 @@ TEST_F(Transport, TenRedirectsAreFollowedAndNoMore) {
     EXPECT_EQ(service().requests().size(), 22U);
 }
 
-TEST_F(Transport, ARedirectWithoutATargetIsAnAnswer) {
+TEST_F(Transport, ARedirectWithoutATargetIsAResponse) {
     Response odd = answer(body);
     odd.status = 302;
     serve(odd);

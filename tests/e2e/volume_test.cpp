@@ -121,7 +121,7 @@ class Volumes : public EndToEndTest, public testing::WithParamInterface<std::tup
     Data ticket;
 };
 
-TEST_P(Volumes, KeepWhatAnArtefactIsBesidesItsContents) {
+TEST_P(Volumes, KeepTheOtherPropertiesOfAnArtefact) {
     const std::string& path = artefact.path;
     ASSERT_EQ(chown(path.c_str(), 1234, 2345), 0);
     setAttribute(path, "user.origin", "somewhere");

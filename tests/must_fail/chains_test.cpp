@@ -100,7 +100,7 @@ std::vector<ChainCase> casesWith(ChainPolicy policy) {
 /// The outcome of a ticket whose chain has the verdict: only 4 counts.
 class SignerTable : public testing::TestWithParam<ChainCase> {};
 
-TEST_P(SignerTable, IsTakenForVerdict4Only) {
+TEST_P(SignerTable, IsAcceptedForVerdict4Only) {
     const ChainCase& one = GetParam();
     const Scene scene = makeScene(one);
     const auto service = scene.service();

@@ -436,7 +436,7 @@ INSTANTIATE_TEST_SUITE_P(OfEveryKind, Unwritable,
 
 // As everywhere, a user with the right to change a directory may remove its contents.
 // Its path is not too long, but the executable in it is out of reach.
-TEST_F(OddArtefact, ABundleWhoseExecutableLiesPastTheLimitOfPathsHasNoHash) {
+TEST_F(OddArtefact, ABundleWhoseExecutableExceedsTheLimitOfPathsHasNoHash) {
     const std::string deep = moveDown(bundle, PATH_MAX - std::string_view(kExecutableInBundle).size());
     expectUnreadable(deep);
 }

@@ -45,7 +45,7 @@ class RestoreArtefact : public testing::Test {
     }
 };
 
-TEST_F(RestoreArtefact, MakesTheImageWhatTheStapleWouldHaveMade) {
+TEST_F(RestoreArtefact, MakesTheSameImageAsTheStaple) {
     for (const std::size_t half :
          {std::size_t{0}, std::size_t{1}, tail.size() / 2, tail.size() - 1, tail.size()}) {
         const std::string old = before.substr(data.size());
@@ -58,7 +58,7 @@ TEST_F(RestoreArtefact, MakesTheImageWhatTheStapleWouldHaveMade) {
     }
 }
 
-TEST_F(RestoreArtefact, CutsOffWhatALongerTailHasLeft) {
+TEST_F(RestoreArtefact, CutsOffTheRestOfALongerTail) {
     writeFile(image, stapled + std::string(100'000, 'x'));
     EXPECT_EQ(restore({image, copy}).exitStatus, 0);
     EXPECT_TRUE(readFile(image) == stapled);
@@ -77,7 +77,7 @@ TEST_F(RestoreArtefact, ExplainsItself) {
               "Usage: restore-artefact IMAGE COPY.dmgData | PACKAGE COPY.pkgTrailers\n");
 }
 
-TEST_F(RestoreArtefact, RefusesWhatItCannotRead) {
+TEST_F(RestoreArtefact, RefusesUnreadableFiles) {
     std::filesystem::remove(copy);
     expectRefused(66);
     std::filesystem::create_directory(copy);
@@ -107,7 +107,7 @@ TEST_F(RestoreArtefact, RefusesACopyThatIsTooShort) {
     }
 }
 
-TEST_F(RestoreArtefact, RefusesACopyOfAnotherLengthThanItSays) {
+TEST_F(RestoreArtefact, RefusesACopyOfAnotherLengthThanStated) {
     writeCopy(tail.substr(0, 20) + tail.substr(21));
     expectRefused(65);
 }
@@ -151,7 +151,7 @@ class RestorePackage : public RestoreArtefact {
     }
 };
 
-TEST_F(RestorePackage, MakesThePackageWhatTheStapleWouldHaveMade) {
+TEST_F(RestorePackage, MakesTheSamePackageAsTheStaple) {
     for (const std::string& rest : {std::string(), std::string(5, '\0'), std::string(1000, 'x')}) {
         writeFile(package, archive + chain().build() + rest);
         const ProcessResult result = restore({package, trailers});
@@ -160,7 +160,7 @@ TEST_F(RestorePackage, MakesThePackageWhatTheStapleWouldHaveMade) {
     }
 }
 
-TEST_F(RestorePackage, RefusesACopyThatBelongsBehindSomethingElse) {
+TEST_F(RestorePackage, RefusesACopyThatBelongsAfterOtherBytes) {
     writeFile(package, archive + chain().terminator().build().substr(1));
     expectPackageRefused(trailers);
 }
@@ -185,7 +185,7 @@ TEST_F(RestorePackage, RefusesACopyThatDoesNotEndInATrailer) {
     expectPackageRefused(trailers);
 }
 
-TEST_F(RestorePackage, TellsACopyByItsName) {
+TEST_F(RestorePackage, RecognisesACopyByItsName) {
     std::filesystem::rename(trailers, directory / "trailers");
     EXPECT_EQ(restore({package, directory / "trailers"}).exitStatus, 64);
 }

@@ -156,7 +156,7 @@ TEST_F(Coordination, AGroupInAnotherOrderGivesEachItsOwnTicket) {
     for (std::size_t i = 0; i < 7; ++i) EXPECT_TRUE(carriesItsTicket(i)) << i;
 }
 
-TEST_F(Coordination, OneThatNobodyHasThoughtOfDoesNotEndTheOthers) {
+TEST_F(Coordination, AnUnexpectedFailureDoesNotEndTheOthers) {
     Names paths = writeBundles(3);
     writeBundle(paths[1], HashByExecutable::kRaises);
     run(paths);
@@ -166,7 +166,7 @@ TEST_F(Coordination, OneThatNobodyHasThoughtOfDoesNotEndTheOthers) {
                     report.path == paths[1] ? Ended(Cause::notReadable, 66, 1) : Ended(Cause::worked, 0, 1));
 }
 
-TEST_F(Coordination, WhatChangedDuringTheLookupIsLookedUpAgain) {
+TEST_F(Coordination, AnArtefactChangedDuringTheLookupIsLookedUpAgain) {
     const Names paths = writeBundles(1);
     std::size_t lookups = 0;
     sessions.answerBy([&](const https::Request& request) {
@@ -191,7 +191,7 @@ TEST_F(Coordination, TellsTheStateOfTheFilesAsTheRunLeftThem) {
 
 // Artefacts that are left out.
 
-TEST_F(Coordination, BeginsOnlyWhatIsWanted) {
+TEST_F(Coordination, BeginsOnlyWantedArtefacts) {
     Names paths = writeBundles(2);
     paths.push_back(paths[0]);
     batch::Selection selection(1, 1);
@@ -206,7 +206,7 @@ TEST_F(Coordination, BeginsOnlyWhatIsWanted) {
     EXPECT_THAT(reports, IsEmpty());
 }
 
-TEST_F(Coordination, LooksNothingUpForWhatIsDone) {
+TEST_F(Coordination, LooksNothingUpForDoneArtefacts) {
     const Names paths = writeBundles(3);
     isDoneBefore = [&](const std::string& path, const retrieval::ArtefactRun& artefact) {
         EXPECT_THAT(artefact.recordName(), testing::StartsWith("2/2/"));
@@ -220,7 +220,7 @@ TEST_F(Coordination, LooksNothingUpForWhatIsDone) {
 
 // Tries.
 
-TEST_F(Coordination, ComesBackWhenTheServiceSays) {
+TEST_F(Coordination, RetriesAtTheTimeThatTheServiceGives) {
     settings.retry.firstDelay = kFarTooLong;
     std::size_t lookups = 0;
     sessions.answerBy([&](const https::Request& request) {
@@ -238,14 +238,14 @@ TEST_F(Coordination, GivesUpAfterTheLastTry) {
     EXPECT_THAT(reports, AllOf(SizeIs(2), Each(Ended(Cause::unreachable, 68, 4))));
 }
 
-TEST_F(Coordination, DoesNotTryAgainWhatIsNotTrusted) {
+TEST_F(Coordination, DoesNotRetryAnUntrustedServer) {
     settings.retry.firstDelay = kFarTooLong;
     sessions.answerBy([](const https::Request&) { return Reply{.isByAStranger = true}; });
     run(writeBundles(2));
     EXPECT_THAT(reports, AllOf(SizeIs(2), Each(Ended(Cause::untrusted, 68, 1))));
 }
 
-TEST_F(Coordination, AsksAgainForWhatIsNotIssuedYet) {
+TEST_F(Coordination, LooksUpAgainWhileNoTicketIsIssued) {
     settings.wait = kFarTooLong;
     std::size_t lookups = 0;
     sessions.answerBy([&](const https::Request& request) {
@@ -259,7 +259,7 @@ TEST_F(Coordination, AsksAgainForWhatIsNotIssuedYet) {
 
 // Ends before their time.
 
-TEST_F(Coordination, TheDeadlineEndsWhatWaitsAndWhatIsNotBegun) {
+TEST_F(Coordination, TheDeadlineEndsWaitingAndUnbegunArtefacts) {
     settings.deadline = Seconds(0.05);
     sessions.answerBy([](const https::Request&) { return Reply{.neverComes = true}; });
     // Only the number of names counts: the batch begins no more than this.
@@ -281,7 +281,7 @@ TEST_F(Coordination, TheTimeOfOneArtefactEndsThatOne) {
     EXPECT_THAT(reports, AllOf(SizeIs(2), Each(Ended(Cause::timedOut, 68, 1))));
 }
 
-TEST_F(Coordination, ASignalEndsWhatWaitsForTheService) {
+TEST_F(Coordination, ASignalEndsArtefactsThatWaitForTheService) {
     sessions.answerBy([this](const https::Request&) {
         sendSignal(SIGTERM);
         return Reply{.neverComes = true};

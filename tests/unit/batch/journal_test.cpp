@@ -48,7 +48,7 @@ class Journals : public testing::Test {
     const std::string file = directory / "journal";
 };
 
-TEST_F(Journals, KeepWhatWorked) {
+TEST_F(Journals, KeepSuccesses) {
     ASSERT_TRUE(addWorked(opened(), staple("/a b%\n.dmg")));
     EXPECT_EQ(readFile(file), kFirst + "0 worked staple 10,20.30,40.50,60 2/2/ab /a%20b%25%0A.dmg\n");
     EXPECT_TRUE(hasDone(staple("/a b%\n.dmg")));
@@ -56,7 +56,7 @@ TEST_F(Journals, KeepWhatWorked) {
     EXPECT_FALSE(hasDone(validation("/a b%\n.dmg")));
 }
 
-TEST_F(Journals, TellWhatIsAtAPathFromWhatWasThere) {
+TEST_F(Journals, DistinguishTheFileAtAPathFromAnEarlierOne) {
     ASSERT_TRUE(addWorked(opened(), staple("/a")));
     for (const char* state : {"11,20.30,40.50,60", "10,20.31,40.50,60", "10,20.30,40.51,60",
                               "10,20.30,40.50,61", "", "-", "10,20.30,40.50,60+1,2.3,4.5,6"})
@@ -66,7 +66,7 @@ TEST_F(Journals, TellWhatIsAtAPathFromWhatWasThere) {
     EXPECT_FALSE(hasDone(other));
 }
 
-TEST_F(Journals, ForgetWhatFailedLater) {
+TEST_F(Journals, ForgetArtefactsThatFailedLater) {
     Journal journal = opened();
     ASSERT_TRUE(journal.add(staple("/a"), 0, Cause::worked));
     ASSERT_TRUE(journal.add(staple("/a"), 65, Cause::notIssued));
@@ -76,7 +76,7 @@ TEST_F(Journals, ForgetWhatFailedLater) {
     EXPECT_FALSE(hasDone(staple("/a")));
 }
 
-TEST_F(Journals, TakeWhatIsNotKnownForNotDone) {
+TEST_F(Journals, TreatUnknownArtefactsAsNotDone) {
     Journal journal = opened();
     ASSERT_TRUE(journal.add(staple("/a", ""), 0, Cause::worked));
     JournalItem nameless = staple("/b");

@@ -55,7 +55,7 @@ class JUnit : public testing::Test {
     const std::string file = directory / "report.xml";
 };
 
-TEST_F(JUnit, TellsFailuresFromErrors) {
+TEST_F(JUnit, DistinguishesFailuresFromErrors) {
     const std::string text = written({reportOf(Cause::worked), reportOf(Cause::notIssued),
                                       reportOf(Cause::unreachable), reportOf(Cause::timedOut)});
     EXPECT_THAT(text, AllOf(HasSubstr(R"(tests="4" failures="1" errors="2" skipped="0")"),
@@ -63,7 +63,7 @@ TEST_F(JUnit, TellsFailuresFromErrors) {
                             HasSubstr(R"(<error type="unreachable")"), HasSubstr(R"(time="1.235")")));
 }
 
-TEST_F(JUnit, EscapesWhatXmlHasAMeaningFor) {
+TEST_F(JUnit, EscapesCharactersWithAMeaningInXml) {
     const std::string text = written({reportOf(Cause::notIssued, "a<b>&\"c\n\x01\xff.dmg", "]]></failure>")});
     EXPECT_THAT(text, AllOf(HasSubstr("a&lt;b&gt;&amp;&quot;c"), HasSubstr("]]&gt;&lt;/failure&gt;"),
                             Not(HasSubstr("\x01")), Not(HasSubstr("\xff"))));

@@ -85,7 +85,7 @@ TEST_F(Selections, TakeALinkForItself) {
     EXPECT_EQ(selection.choose(directory / "link"), Choice::wanted);
 }
 
-TEST_F(Selections, TakeWhatIsNotThereOnce) {
+TEST_F(Selections, TakeAMissingFileOnce) {
     EXPECT_EQ(selection.choose("/no/such/path"), Choice::wanted);
     EXPECT_EQ(selection.choose("/no/such/path"), Choice::namedBefore);
 }
@@ -115,7 +115,7 @@ TEST(CanonicalPath, IsAbsoluteAndWithoutLinksAbove) {
     EXPECT_EQ(canonicalPath("/no/such/file"), "/no/such/file");
 }
 
-TEST(TextSet, KnowsWhatWasAdded) {
+TEST(TextSet, ContainsAddedTexts) {
     batch::TextSet set;
     for (int i = 0; i < 5000; ++i) EXPECT_TRUE(set.add(std::to_string(i)));
     for (int i = 0; i < 5000; ++i) EXPECT_FALSE(set.add(std::to_string(i)));

@@ -38,7 +38,7 @@ TEST(SummaryOfABatch, CountsCausesAndKeepsTheWorstStatus) {
         R"("seconds":1.5}})");
 }
 
-TEST(SummaryOfABatch, SaysWhatWasLeftOut) {
+TEST(SummaryOfABatch, CountsSkippedArtefacts) {
     Summary summary = summaryOf({{Cause::worked, 0}});
     summary.resumed = 3;
     summary.duplicates = 2;

@@ -12,7 +12,7 @@ namespace {
 
 using batch::Workers;
 
-TEST(Workers, DoWhatTheyAreGiven) {
+TEST(Workers, RunTheirTasks) {
     std::atomic<int> done = 0;
     std::promise<void> all;
     {
@@ -61,7 +61,7 @@ TEST(Workers, TakeUrgentTasksFirst) {
     EXPECT_THAT(order, testing::ElementsAre(3, 1, 2));
 }
 
-TEST(Workers, DropWhatHasNotBegunWhenTheyEnd) {
+TEST(Workers, DropUnbegunTasksAtTheirEnd) {
     std::atomic<int> done = 0;
     std::promise<void> begun;
     std::promise<void> mayGoOn;

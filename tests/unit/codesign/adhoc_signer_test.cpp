@@ -161,7 +161,7 @@ TEST_F(AdHocSigning, OfAFileHasTheHashOfItsCodeDirectory) {
     EXPECT_EQ(information.flags, 2U);
 }
 
-TEST_F(AdHocSigning, OfADiskImageCoversWhatStandsBeforeItsTrailer) {
+TEST_F(AdHocSigning, OfADiskImageCoversTheBytesBeforeItsTrailer) {
     const Data content(1000, std::byte{0x42});
     const Data codeDirectory = layOutOpaqueCodeDirectory(
         {"ADHOC", 1000, codeDigest(2, DiskImageBuilder().trailer()), codeDigest(2, content)});

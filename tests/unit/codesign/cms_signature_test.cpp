@@ -59,7 +59,7 @@ TEST(CmsSignature, RefusesAMessageThatCarriesItsContent) {
     EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kContent).attached().build(), kContent));
 }
 
-TEST(CmsSignature, RefusesWhatIsNoSignedData) {
+TEST(CmsSignature, RefusesOtherContentThanSignedData) {
     EXPECT_FALSE(verifyDetachedCms({}, kContent));
     EXPECT_FALSE(verifyDetachedCms(Data(100), kContent));
     EXPECT_FALSE(verifyDetachedCms(foundation::toData("0\x80"), kContent));
@@ -69,7 +69,7 @@ TEST(CmsSignature, RefusesWhatIsNoSignedData) {
     EXPECT_FALSE(verifyDetachedCms(std::as_bytes(std::span(data)), kContent));
 }
 
-TEST(CmsSignature, RefusesBytesBehindTheMessage) {
+TEST(CmsSignature, RefusesBytesAfterTheMessage) {
     Data cms = CmsBuilder(kContent).build();
     cms.push_back(std::byte{0});
     EXPECT_FALSE(verifyDetachedCms(cms, kContent));

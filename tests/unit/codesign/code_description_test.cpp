@@ -125,7 +125,7 @@ TEST_F(Description, ReadsASignatureInSeparateFiles) {
     EXPECT_EQ(signature.directories.at(0).codeHash, test::codeHashOf(2, codeDirectory));
 }
 
-TEST_F(Description, OfNothingSaysWhatIsMissing) {
+TEST_F(Description, OfNothingNamesTheMissingPart) {
     const CodeDescription description = describeCode(directory / "missing");
     EXPECT_EQ(description.status, kStaticCodeNotFound);
     EXPECT_NE(description.problem, "");

@@ -32,7 +32,7 @@ std::uint32_t sizeOf(const CodeDirectoryBuilder& builder) {
     return static_cast<std::uint32_t>(builder.build().size());
 }
 
-TEST(CodeDirectory, SaysWhatItSays) {
+TEST(CodeDirectory, HasTheValuesOfItsFields) {
     const Data blob =
         CodeDirectoryBuilder().identifier("com.example.tool").team("TEAM123456").flags(0x10002).build();
     const CodeDirectory directory = CodeDirectory::parse(blob);
@@ -111,7 +111,7 @@ TEST(CodeDirectory, RefusesADigestSizeThatIsNotItsTypes) {
     expectRefused(CodeDirectoryBuilder().digestSize(0));
 }
 
-TEST(CodeDirectory, RefusesAnIdentifierThatLiesOutside) {
+TEST(CodeDirectory, RefusesAnIdentifierOutsideOfIt) {
     expectRefused(CodeDirectoryBuilder().identifierOffset(sizeOf(CodeDirectoryBuilder())));
     expectRefused(CodeDirectoryBuilder().identifierOffset(0xFFFFFFFF));
 }
@@ -130,7 +130,7 @@ TEST(CodeDirectory, MayHaveAnEmptyIdentifier) {
     EXPECT_EQ(CodeDirectory::parse(CodeDirectoryBuilder().identifier("").build()).identifier(), "");
 }
 
-TEST(CodeDirectory, RefusesATeamThatLiesOutsideOrHasNoEnd) {
+TEST(CodeDirectory, RefusesATeamOutsideOfItOrWithoutAnEnd) {
     const std::uint32_t size = sizeOf(CodeDirectoryBuilder());
     expectRefused(CodeDirectoryBuilder().teamOffset(size));
     expectRefused(CodeDirectoryBuilder().teamOffset(size - 1));
@@ -149,14 +149,14 @@ TEST(CodeDirectory, RefusesMoreSpecialSlotsThanItHolds) {
     expectRefused(CodeDirectoryBuilder(builder).specialSlotCount(2));
 }
 
-TEST(CodeDirectory, RefusesAHashOffsetThatLiesOutside) {
+TEST(CodeDirectory, RefusesAHashOffsetOutsideOfIt) {
     const std::uint32_t size = sizeOf(CodeDirectoryBuilder());
     expectRefused(CodeDirectoryBuilder().hashOffset(size - 63));
     expectRefused(CodeDirectoryBuilder().hashOffset(0xFFFFFFFF));
     expectRefused(CodeDirectoryBuilder().hashOffset(0));
 }
 
-TEST(CodeDirectory, RefusesAPreEncryptionListThatLiesOutside) {
+TEST(CodeDirectory, RefusesAPreEncryptionListOutsideOfIt) {
     const auto builder = CodeDirectoryBuilder().version(0x20500);
     expectRefused(CodeDirectoryBuilder(builder).preEncryptionOffset(sizeOf(builder) - 63));
     expectRefused(CodeDirectoryBuilder(builder).preEncryptionOffset(95));
@@ -204,7 +204,7 @@ TEST(CodeDirectory, EndsCleanlyWhereverItIsCut) {
     }
 }
 
-TEST(CodeDirectory, TellsADigestTypeThatIsNoneOfOurs) {
+TEST(CodeDirectory, ReportsAnUnknownDigestType) {
     EXPECT_EQ(CodeDirectory::digestTypeNumberOf(CodeDirectoryBuilder().digestType(9).build()), 9);
     EXPECT_THROW(CodeDirectory::digestTypeNumberOf(makeBlob(0xFADE0C02, Data(10))), ShortRead);
     EXPECT_THROW(CodeDirectory::digestTypeNumberOf(makeBlob(0xFADE0C01, Data(100))), CodeError);

@@ -100,7 +100,7 @@ TEST(ThinImage, RefusesLoadCommandsBeyondTheFile) {
 }
 
 // The list is read piece by piece: one command that is longer than a piece, and many in several pieces.
-TEST(ThinImage, FindsItsSignatureBehindLoadCommandsOfAnyLengthAndNumber) {
+TEST(ThinImage, FindsItsSignatureAfterLoadCommandsOfAnyLengthAndNumber) {
     const Data superblob = SuperBlobBuilder::adHoc().build();
     EXPECT_EQ(signatureBytes(ExecutableImageBuilder().loadCommand(0x19, Data(5'000'000)).build()), superblob);
     ExecutableImageBuilder many;

@@ -121,7 +121,7 @@ TEST(ReadAhead, CanBeDroppedBeforeAnythingWasAskedFor) {
     EXPECT_LE(source.piecesRead(), kReadAheadPieces);
 }
 
-TEST(ReadAhead, ThrowsWhatReadingThrewAfterThePiecesBefore) {
+TEST(ReadAhead, RethrowsAReadersExceptionAfterThePiecesBeforeIt) {
     for (const std::uint64_t failing : {0U, 1U, 7U, 9U}) {
         const NumberedPieces source(10, failing);
         ReadAhead pieces(source, source.size());

@@ -123,7 +123,7 @@ TEST_F(StaticCodeOfAPath, FailsCleanlyWhenTheFileShrinksUnderIt) {
     EXPECT_EQ(service.checkValidity(*code, kValidityFlags), codesign::kIOError);
 }
 
-TEST_F(StaticCodeOfAPath, AnswersAboutTheFileThatWasFound) {
+TEST_F(StaticCodeOfAPath, IsAboutTheFileThatWasFound) {
     writeFile(scratch / "image", imageNamed("old"));
     std::shared_ptr<codesign::StaticCode> code;
     ASSERT_EQ(service.createStaticCode(scratch.url("image"), 0, code), kSuccess);
@@ -147,7 +147,7 @@ TEST_F(StaticCodeOfAPath, NeedsGoodParameters) {
     EXPECT_EQ(service.checkValidity(*code, 0), kUnimplemented);
 }
 
-TEST_F(StaticCodeOfAPath, MustBeOfTheServiceThatIsAsked) {
+TEST_F(StaticCodeOfAPath, MustBeOfTheSameService) {
     struct Foreign : codesign::StaticCode {};
     Foreign foreign;
     std::optional<codesign::SigningInformation> information;
@@ -180,7 +180,7 @@ class SeparateSignature : public CodeSigningTest {
     }
 };
 
-TEST_F(SeparateSignature, StandsInFilesOfTheBundle) {
+TEST_F(SeparateSignature, IsInFilesOfTheBundle) {
     const Data codeDirectory = CodeDirectoryBuilder().flags(0).covers(2, emptyRequirements()).build();
     const Data cms = CmsBuilder(codeDirectory).timestamp(TimestampBuilder()).build();
     const Answer answer = askAboutBundle(

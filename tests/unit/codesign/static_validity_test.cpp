@@ -267,7 +267,7 @@ TEST_F(DiskImageValidity, MayLeaveTheTrailerUncovered) {
         kSuccess);
 }
 
-TEST_F(DiskImageValidity, WinsOverWhatTheFileBeginsWith) {
+TEST_F(DiskImageValidity, TakesPrecedenceOverTheBeginningOfTheFile) {
     const Data image = ExecutableImageBuilder().build();
     const Data codeDirectory = CodeDirectoryBuilder().identifier("com.example.disk").build();
     const Data superblob = SuperBlobBuilder::adHoc(codeDirectory).build();

@@ -62,7 +62,7 @@ TEST(SuperBlob, MayHaveGapsBetweenItsBlobs) {
     EXPECT_EQ(parseSuperBlob(bytes).size(), 2U);
 }
 
-TEST(SuperBlob, EndsWhereItsOwnLengthSays) {
+TEST(SuperBlob, EndsAtItsOwnLength) {
     Data bytes = threeBlobs().build();
     bytes.resize(bytes.size() + 1000, std::byte{0xFF});
     EXPECT_EQ(parseSuperBlob(bytes).size(), 3U);
@@ -177,7 +177,7 @@ TEST(SuperBlobInAFile, RefusesAnAreaBeyondTheFile) {
 }
 
 // A file with zeros after the blobs.
-TEST(SuperBlobInAFile, TakesMemoryForWhatIsThereWhateverItsLength) {
+TEST(SuperBlobInAFile, TakesMemoryForExistingBytesWhateverItsLength) {
     const TemporaryDirectory directory;
     const std::string path = directory / "signed";
     writeFile(path, ByteView(threeBlobs().length(0xFFFFFFFF).build()));

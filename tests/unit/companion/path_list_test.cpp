@@ -47,7 +47,7 @@ TEST_F(PathLists, KeepEveryByteOfAPath) {
     EXPECT_THAT(read(" a \n\tb\r\n\xff\n"), ElementsAre(" a ", "\tb\r", "\xff"));
 }
 
-TEST_F(PathLists, EndPathsWithZeroBytesIfToldTo) {
+TEST_F(PathLists, EndPathsWithZeroBytesOnRequest) {
     EXPECT_THAT(read(std::string("a\nb\0\0c", 6), true), ElementsAre("a\nb", "c"));
 }
 
@@ -58,7 +58,7 @@ TEST_F(PathLists, CutALineThatIsTooLongToNameAnything) {
     EXPECT_EQ(paths[1], "short");
 }
 
-TEST_F(PathLists, KeepALineThatLiesAcrossTwoReads) {
+TEST_F(PathLists, KeepALineAcrossTwoReads) {
     std::string contents;
     std::vector<std::string> expected;
     for (int i = 0; contents.size() < 300'000; ++i) {

@@ -44,19 +44,19 @@ class UserDefaultsTest : public testing::Test {
     ScopedVariable configuration_{"XDG_CONFIG_HOME", directory_.path()};
 };
 
-TEST_F(UserDefaultsTest, AnswerWhatTheUserChose) {
+TEST_F(UserDefaultsTest, ReturnTheUsersValue) {
     const auto defaults = openFile(R"({"container": "chosen", "production": false})");
     EXPECT_EQ(defaults->stringForKey("container"), "chosen");
     EXPECT_FALSE(defaults->boolForKey("production"));
 }
 
-TEST_F(UserDefaultsTest, AnswerTheRegisteredValueForAMissingOne) {
+TEST_F(UserDefaultsTest, ReturnTheRegisteredValueForAMissingOne) {
     const auto defaults = openFile(R"({"production": false})");
     EXPECT_EQ(defaults->stringForKey("container"), "registered");
     EXPECT_FALSE(defaults->boolForKey("production"));
 }
 
-TEST_F(UserDefaultsTest, AnswerTheRegisteredValueForOneOfAnotherType) {
+TEST_F(UserDefaultsTest, ReturnTheRegisteredValueForOneOfAnotherType) {
     const auto defaults = openFile(R"({"container": 5, "production": "false"})");
     expectRegistered(*defaults);
     expectRegistered(*openFile(R"({"container": null, "production": 0})"));
@@ -67,7 +67,7 @@ TEST_F(UserDefaultsTest, MayBeEmptyText) {
     EXPECT_EQ(openFile(R"({"container": ""})")->stringForKey("container"), "");
 }
 
-TEST_F(UserDefaultsTest, AnswerNothingForWhatNeitherKnows) {
+TEST_F(UserDefaultsTest, ReturnNothingForAnUnknownKey) {
     const auto defaults = openFile("{}");
     EXPECT_EQ(defaults->stringForKey("unknown"), "");
     EXPECT_FALSE(defaults->boolForKey("unknown"));
@@ -128,7 +128,7 @@ TEST_F(UserDefaultsTest, AreTheRegisteredOnesWithoutAHomeDirectory) {
     expectRegistered(*open());
 }
 
-TEST(FakeUserDefaults, AnswerAsTheRealOnesDo) {
+TEST(FakeUserDefaults, BehaveLikeTheRealOnes) {
     test::FakeUserDefaultsService service;
     service.domains.insert_or_assign("d", Dictionary{{"text", "chosen"}, {"flag", 1}});
     const auto defaults = service.openDomain("d");

@@ -17,7 +17,7 @@ TEST_F(BundleExecutable, IsNotHadOfAnEmptyDirectory) {
     EXPECT_EQ(manager->mainExecutableOfBundle(url("Tool.app")), std::nullopt);
 }
 
-TEST_F(BundleExecutable, IsNotHadOfWhatIsNoFileURL) {
+TEST_F(BundleExecutable, ReturnsNulloptForNonFileUrl) {
     EXPECT_EQ(manager->mainExecutableOfBundle(*files::URL::fromString("https://host.example/Tool.app")),
               std::nullopt);
 }

@@ -63,14 +63,14 @@ TEST_F(Cloning, IsNotSupportedInMemory) {
     EXPECT_FALSE(answerOn(volume, irregularBytes(5000)));
 }
 
-TEST_F(Cloning, AnswersOnWhateverTheTestsRunOnAndLeavesNothing) {
+TEST_F(Cloning, IsProbedOnEveryFileSystemWithoutATrace) {
     writeFile(path("file"), "contents");
     EXPECT_THAT(manager->volumeSupportsCloning(url("file")), Succeeds());
     EXPECT_THAT(namesIn(directory.path()), ElementsAre("file"));
     EXPECT_EQ(readFile(path("file")), "contents");
 }
 
-TEST_F(Cloning, CannotBeAskedOfAFileThatMayNotBeRead) {
+TEST_F(Cloning, CannotBeProbedForAnUnreadableFile) {
     const AsOrdinaryUser user(directory.path());
     writeFile(path("file"), "contents");
     setMode(path("file"), 0200);
@@ -78,7 +78,7 @@ TEST_F(Cloning, CannotBeAskedOfAFileThatMayNotBeRead) {
 }
 
 // The probe makes nothing, so the run continues and finds that it cannot make a directory there.
-TEST_F(Cloning, IsAskedInADirectoryThatMayNotBeWritten) {
+TEST_F(Cloning, IsProbedInAReadOnlyDirectory) {
     const Volume volume("xfs");
     if (volume.missing()) GTEST_SKIP() << *volume.missing();
     writeFile(volume / "folder/file", irregularBytes(5000));
@@ -94,7 +94,7 @@ TEST_F(Cloning, IsAskedInADirectoryThatMayNotBeWritten) {
 }
 
 // The kernel does not report the file system's abilities for it; its directory still allows a replacement.
-TEST_F(Cloning, IsAskedOfAnothersFileThatMayOnlyBeRead) {
+TEST_F(Cloning, IsProbedForAnotherUsersReadOnlyFile) {
     const Volume volume("xfs");
     if (volume.missing()) GTEST_SKIP() << *volume.missing();
     if (!isSuperuser()) GTEST_SKIP() << "only the superuser can make another user's file";
@@ -110,7 +110,7 @@ TEST_F(Cloning, IsAskedOfAnothersFileThatMayOnlyBeRead) {
     EXPECT_THAT(namesIn(volume / "folder"), ElementsAre("file"));
 }
 
-TEST_F(Cloning, CannotBeAskedOfWhatIsNoRegularFile) {
+TEST_F(Cloning, CannotBeProbedForASpecialFile) {
     makeDirectory(path("folder"));
     makeLink("folder", path("link"));
     makeFifo(path("fifo"));

@@ -20,7 +20,7 @@ TEST_F(CopyOfContents, HasTheBytesAndTheModeOfAnyNewFile) {
     EXPECT_EQ(permissionsOf(path("copy")), 0640U);
 }
 
-TEST_F(CopyOfContents, NeverReplacesWhatIsThere) {
+TEST_F(CopyOfContents, NeverReplacesAnExistingFile) {
     writeFile(path("copy"), "there before");
     EXPECT_THAT(copy(), FailsWith(EEXIST, path("copy")));
     EXPECT_EQ(readFile(path("copy")), "there before");

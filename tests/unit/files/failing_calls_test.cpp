@@ -151,7 +151,7 @@ TEST_F(FailingCalls, InACopyOfAFileSystemThatKnowsNoHoles) {
     EXPECT_EQ(readFile(path("copy")), contents);
 }
 
-TEST_F(FailingCalls, ThatLoseAnAccessControlListOpenTheFileToNobody) {
+TEST_F(FailingCalls, ThatLoseAnAccessControlListGrantNoAccess) {
     prepareFiles();
     ASSERT_EQ(permissionsOf(path("original")), 0640U);  // the mask; the owning group itself has no rights
     {
@@ -296,7 +296,7 @@ TEST_F(FailingCalls, InTheQuestionOfCloningLeaveNothing) {
                  });
 }
 
-TEST_F(FailingCalls, InTheQuestionOfCloningMeanNoWhereTheKernelSaysNotHere) {
+TEST_F(FailingCalls, InTheProbeOfCloningMeanNoIfTheKernelLacksSupport) {
     prepareFiles();
     for (const int reason : {EOPNOTSUPP, EXDEV, ENOTTY, EINVAL}) {
         const Trouble trouble = Trouble::atEvery({"ioctl"}, reason);
@@ -345,7 +345,7 @@ TEST_F(FailingCalls, InAWholeReadComeOut) {
     EXPECT_THAT((std::set<std::string>{"fstatat", "openat", "fstat", "read"}), IsSubsetOf(calls));
 }
 
-TEST_F(FailingCalls, OfAHandleComeOutWithWhatWasTried) {
+TEST_F(FailingCalls, OfAHandleAreReportedWithTheOperation) {
     writeFile(path("file"), "contents");
     struct Row {
         const char* call;

@@ -64,16 +64,16 @@ TEST_F(Handle, ReadsLessOnlyAtTheEnd) {
     EXPECT_EQ(handle->read(100).size(), 0U);
 }
 
-TEST_F(Handle, ReadsWhatIsThereWhenAskedForFarMore) {
+TEST_F(Handle, ReadsTheExistingBytesIfFarMoreAreRequested) {
     const auto handle = reading("all");
     EXPECT_EQ(toString(handle->read(std::numeric_limits<std::uint64_t>::max())), "all");
 }
 
-TEST_F(Handle, ReadsNothingWhenAskedForNothing) {
+TEST_F(Handle, ReadsNothingForALengthOfZero) {
     EXPECT_TRUE(reading("all")->read(0).empty());
 }
 
-TEST_F(Handle, TellsTheEnd) {
+TEST_F(Handle, ReportsTheEnd) {
     const auto handle = reading("0123456789");
     EXPECT_EQ(handle->seekToEnd(), 10U);
     EXPECT_EQ(handle->position(), 10U);
@@ -117,7 +117,7 @@ TEST_F(Handle, TruncatesToMoreWithZeroes) {
     EXPECT_EQ(readFile(path("file")), std::string("01\0\0", 4));
 }
 
-TEST_F(Handle, RefusesToTruncateToWhatNoFileHas) {
+TEST_F(Handle, RefusesToTruncateToAnImpossibleLength) {
     const auto handle = updating("x");
     EXPECT_THAT(reasonOf([&] { handle->truncate(std::numeric_limits<std::uint64_t>::max()); }),
                 StartsWith("Cannot truncate " + path("file") + ": "));
@@ -132,7 +132,7 @@ TEST_F(Handle, ForReadingDoesNotWrite) {
     EXPECT_EQ(readFile(path("file")), "x");
 }
 
-TEST_F(Handle, SaysWhyAWriteFailed) {
+TEST_F(Handle, ReportsTheCauseOfAFailedWrite) {
     const auto handle = updating("");
     std::signal(SIGXFSZ, SIG_IGN);
     const std::string reason = [&] {

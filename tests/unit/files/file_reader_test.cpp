@@ -66,7 +66,7 @@ TEST_F(Reader, LeavesTheDescriptorOpen) {
     EXPECT_NE(fcntl(descriptor.get(), F_GETFD), -1);
 }
 
-TEST_F(Reader, ReadsNothingBehindTheEnd) {
+TEST_F(Reader, ReadsNothingAfterTheEnd) {
     const FileDescriptor descriptor = opened("0123456789");
     const auto reader = files::readerOf(descriptor.get(), "it");
     ASSERT_TRUE(reader);
@@ -106,7 +106,7 @@ TEST_F(Reader, RefusesDescriptorsOfAnythingButARegularFile) {
 }
 
 // Data, a hole, data in the middle of a piece, and a hole up to the end.
-TEST_F(Reader, ReadsASparseFileAsWhatItIs) {
+TEST_F(Reader, ReadsTheHolesOfASparseFileAsZeros) {
     constexpr std::uint64_t kLength = 40ULL * 1024 * 1024;
     writeFile(path("file"), std::string(5000, 'a'));
     const FileDescriptor writer(open(path("file").c_str(), O_WRONLY | O_CLOEXEC));

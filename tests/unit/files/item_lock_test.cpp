@@ -45,7 +45,7 @@ TEST_F(Lock, HoldsUntilItDies) {
     EXPECT_EQ(readFile(path("file")), "contents");
 }
 
-TEST_F(Lock, IsHadOnADirectoryToo) {
+TEST_F(Lock, CanBeTakenOnADirectory) {
     makeDirectory(path("directory"));
     const auto lock = manager->lockItem(url("directory"), silent);
     ASSERT_THAT(lock, Succeeds());
@@ -59,7 +59,7 @@ TEST_F(Lock, ThatAnotherHoldsIsBusyWhenPatienceEnds) {
     EXPECT_THAT(lockPath(places, path("file"), 30ms, silent), FailsWith(EBUSY, path("file")));
 }
 
-TEST_F(Lock, SaysOnceThatItWaits) {
+TEST_F(Lock, ReportsOnceThatItWaits) {
     int said = 0;
     const auto first = lockPath(places, path("file"), 0ms, [&] { ++said; });
     EXPECT_EQ(said, 0);
@@ -77,7 +77,7 @@ TEST_F(Lock, IsNotTakenWhereItWouldBlockOthers) {
         EXPECT_FALSE(files::hasMandatoryLocks(type)) << std::hex << type;
 }
 
-TEST_F(Lock, IsHadWhenTheOtherLetsGo) {
+TEST_F(Lock, IsTakenWhenTheOtherIsReleased) {
     auto first = lockPath(places, path("file"), 0ms, silent);
     ASSERT_THAT(first, Succeeds());
     auto second = std::async(std::launch::async, [&] { return manager->lockItem(url("file"), silent); });
@@ -85,7 +85,7 @@ TEST_F(Lock, IsHadWhenTheOtherLetsGo) {
     ASSERT_THAT(second.get(), Succeeds());
 }
 
-TEST_F(Lock, IsOnTheFileThatThePathNamesOnceItIsHad) {
+TEST_F(Lock, IsOnTheFileThatThePathNamesAfterwards) {
     auto first = lockPath(places, path("file"), 0ms, silent);
     ASSERT_THAT(first, Succeeds());
     auto second = std::async(std::launch::async, [&] { return manager->lockItem(url("file"), silent); });
@@ -133,13 +133,13 @@ TEST_F(State, StaysWhenTheFileIsClonedOnVolumesThatClone) {
     }
 }
 
-TEST_F(State, TellsAnotherLength) {
+TEST_F(State, SeesAnotherLength) {
     const auto before = state();
     writeFile(path("file"), "longer contents");
     EXPECT_NE(state(), before);
 }
 
-TEST_F(State, TellsAnotherFileInItsPlace) {
+TEST_F(State, SeesAReplacedFile) {
     const auto before = state();
     writeFile(path("other"), "contents");
     std::filesystem::rename(path("other"), path("file"));
@@ -154,7 +154,7 @@ TEST_F(State, DoesNotCountModeLinksAndAttributes) {
     EXPECT_EQ(state(), before);
 }
 
-TEST_F(State, TellsTimesANanosecondApart) {
+TEST_F(State, SeesTimesANanosecondApart) {
     for (const long nanoseconds : {1L, 2L}) {
         const std::array<timespec, 2> times{timespec{0, UTIME_OMIT}, timespec{1000, nanoseconds}};
         ASSERT_EQ(utimensat(AT_FDCWD, path("file").c_str(), times.data(), 0), 0);
@@ -163,7 +163,7 @@ TEST_F(State, TellsTimesANanosecondApart) {
     }
 }
 
-TEST_F(State, OfWhatIsNotThereIsAnError) {
+TEST_F(State, OfAMissingFileIsAnError) {
     EXPECT_THAT(manager->stateOfItem(url("none")), FailsWith(ENOENT, path("none")));
 }
 

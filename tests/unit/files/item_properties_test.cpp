@@ -26,7 +26,7 @@ class ItemProperties : public FilesTest {
     }
 };
 
-TEST_F(ItemProperties, AreWhatTheItemIsAndWhatTheTypeServiceSays) {
+TEST_F(ItemProperties, AreTheFactsOfTheItemAndTheTypeService) {
     makeDirectory(path("Tool.app"));
     const auto naming = [](const ItemFacts&) {
         return ItemType{"com.ostrel.application-bundle", "application", true, true};
@@ -88,7 +88,7 @@ TEST_F(ItemProperties, AreHadForANameOf255Bytes) {
     EXPECT_EQ(factsOf(name).name, name);
 }
 
-TEST_F(ItemProperties, FailForWhatIsNotThere) {
+TEST_F(ItemProperties, FailForAMissingItem) {
     EXPECT_THAT(manager->resourceProperties(url("none")), FailsWith(ENOENT, path("none")));
 }
 
@@ -153,7 +153,7 @@ TEST_F(RegularFileQuestion, IsYesForAFileAlone) {
     EXPECT_FALSE(answer("fifo"));
 }
 
-TEST_F(RegularFileQuestion, FailsForWhatIsNotThere) {
+TEST_F(RegularFileQuestion, FailsForAMissingFile) {
     EXPECT_THAT(manager->isRegularFile(url("none")), FailsWith(ENOENT, path("none")));
 }
 

@@ -43,7 +43,7 @@ TEST_F(Recording, ShowsThatNothingWasWritten) {
                             "handle.seekToEnd", "handle.seek", "handle.read"));
 }
 
-TEST_F(Recording, ShowsWhatWasWritten) {
+TEST_F(Recording, ShowsTheWrittenBytes) {
     ASSERT_THAT(recording.writeFile(asBytes("x"), url("new"), FileManager::Writing::plain), Succeeds());
     const auto handle = recording.openForUpdating(url("file"));
     ASSERT_THAT(handle, Succeeds());
@@ -79,7 +79,7 @@ TEST_F(Recording, FailsAHandlesOperationAsAHandleDoes) {
     EXPECT_EQ(readFile(path("file")), "contents");
 }
 
-TEST_F(Recording, AnswersTheQuestionOfCloningAsItIsTold) {
+TEST_F(Recording, ReportsCloningAsConfigured) {
     for (const bool answer : {true, false}) {
         recording.answerCloning(answer);
         const auto answered = recording.volumeSupportsCloning(url("file"));
@@ -100,7 +100,7 @@ TEST_F(Recording, TrashesIntoADirectoryOfItsOwn) {
     EXPECT_FALSE(exists(path("file")));
 }
 
-TEST_F(Recording, NamesTypesAsItIsTold) {
+TEST_F(Recording, NamesTypesAsConfigured) {
     RecordingFileManager images([](const files::ItemFacts&) {
         return files::ItemType{"com.ostrel.disk-image-udif", "disk image", false, false};
     });

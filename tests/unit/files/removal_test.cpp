@@ -29,7 +29,7 @@ TEST_F(Removal, TakesOneOfTwoHardLinks) {
     EXPECT_EQ(readFile(path("other")), "x");
 }
 
-TEST_F(Removal, TakesALinkAndNotWhatItLeadsTo) {
+TEST_F(Removal, RemovesALinkAndNotItsTarget) {
     writeFile(path("folder/file"), "x");
     makeLink("folder", path("link"));
     ASSERT_THAT(remove("link"), Succeeds());
@@ -90,7 +90,7 @@ TEST_F(Removal, TakesADirectoryOfManyFiles) {
     EXPECT_FALSE(exists(path("tree")));
 }
 
-TEST_F(Removal, FailsForWhatIsNotThere) {
+TEST_F(Removal, FailsForAMissingItem) {
     EXPECT_THAT(remove("none"), FailsWith(ENOENT, path("none")));
 }
 

@@ -62,7 +62,7 @@ class Trash : public FilesTest {
 
 std::unique_ptr<TemporaryDirectory> Trash::home;
 
-TEST_F(Trash, TakesAFileAndTellsWhereItIs) {
+TEST_F(Trash, TakesAFileAndReturnsItsPlace) {
     writeFile(path("CodeResources"), "ticket");
     const auto place = manager->trashItem(url("CodeResources"));
     ASSERT_THAT(place, Succeeds());
@@ -73,7 +73,7 @@ TEST_F(Trash, TakesAFileAndTellsWhereItIs) {
                 HasSubstr("Path=" + path("CodeResources") + "\n"));
 }
 
-TEST_F(Trash, TellsApartTwoItemsOfOneName) {
+TEST_F(Trash, KeepsTwoItemsOfOneNameApart) {
     writeFile(path("twin"), "first");
     const auto first = manager->trashItem(url("twin"));
     writeFile(path("twin"), "second");
@@ -84,7 +84,7 @@ TEST_F(Trash, TellsApartTwoItemsOfOneName) {
     EXPECT_EQ(readFile(second->path()), "second");
 }
 
-TEST_F(Trash, TakesALinkAndNotWhatItLeadsTo) {
+TEST_F(Trash, TakesALinkAndNotItsTarget) {
     writeFile(path("target"), "x");
     makeLink(path("target"), path("link"));
     const auto place = manager->trashItem(url("link"));
@@ -143,7 +143,7 @@ TEST_F(Trash, OfAnotherVolumeIsTheSharedOneWhereThereIsOne) {
     EXPECT_EQ(readFile(place->path()), "x");
 }
 
-TEST_F(Trash, RefusesWhatIsNotThere) {
+TEST_F(Trash, RefusesAMissingItem) {
     EXPECT_THAT(manager->trashItem(url("none")), FailsWith(ENOENT, path("none")));
 }
 

@@ -166,7 +166,7 @@ class AtomicWriting : public FilesTest {
     }
 };
 
-TEST_F(AtomicWriting, ReplacesALinkAndNotWhatItLeadsTo) {
+TEST_F(AtomicWriting, ReplacesALinkAndNotItsTarget) {
     writeFile(path("target"), "precious");
     makeLink("target", path("link"));
     ASSERT_THAT(write("contents", "link"), Succeeds());

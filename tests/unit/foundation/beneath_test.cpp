@@ -63,7 +63,7 @@ class Beneath : public testing::TestWithParam<Way> {
     FileDescriptor root_;
 };
 
-TEST_P(Beneath, OpensWhatIsBelow) {
+TEST_P(Beneath, OpensFilesBelow) {
     EXPECT_EQ(at("a/b/file"), "inside");
     EXPECT_EQ(at("./a//b/./file"), "inside");
     EXPECT_EQ(at("a/../a/b/file"), "inside");
@@ -117,7 +117,7 @@ TEST_P(Beneath, RefusesTheLinksOfTheProcessFileSystem) {
     EXPECT_EQ(at("magic/passwd"), reason(EXDEV));
 }
 
-TEST_P(Beneath, LeavesTheLastLinkAloneIfAsked) {
+TEST_P(Beneath, DoesNotFollowTheLastLinkOnRequest) {
     makeLink("b/file", path("a/link"));
     EXPECT_EQ(at("a/link"), "inside");
     EXPECT_EQ(at("a/link", O_RDONLY | O_NOFOLLOW), reason(ELOOP));
@@ -131,7 +131,7 @@ TEST_P(Beneath, EndsOnLinksThatGoRoundInCircles) {
     EXPECT_EQ(at("self/file"), reason(ELOOP));
 }
 
-TEST_P(Beneath, SaysWhatIsMissingOrNoDirectory) {
+TEST_P(Beneath, ReportsMissingFilesAndNonDirectories) {
     makeLink("none", path("dangling"));
     EXPECT_EQ(at("none"), reason(ENOENT));
     EXPECT_EQ(at("none/file"), reason(ENOENT));

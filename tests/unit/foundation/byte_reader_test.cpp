@@ -48,7 +48,7 @@ TEST(ByteReader, KeepsTheHighestBit) {
     EXPECT_EQ(ByteReader(data).be16("x"), 0xFFFF);
 }
 
-TEST(ByteReader, NamesWhatItWasReadingAndWhere) {
+TEST(ByteReader, NamesTheFieldAndItsOffset) {
     const Data data(6);
     ByteReader reader(data, 100);
     reader.skip(4, "header");
@@ -129,7 +129,7 @@ TEST(ByteReader, SubReaderMayBeEmptyAtTheEnd) {
     EXPECT_TRUE(ByteReader(data).sub(3, 0, "rest").atEnd());
 }
 
-TEST(ByteWriter, WritesWhatTheReaderReads) {
+TEST(ByteWriter, WritesTheFormOfTheReader) {
     const Data data = ByteWriter().le16(0x0102).le32(0x03040506).le64(7).text("ab").zeros(2).u8(9).data();
     ByteReader reader(data);
     EXPECT_EQ(reader.le16("a"), 0x0102);

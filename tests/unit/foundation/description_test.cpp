@@ -146,7 +146,7 @@ TEST(Description, OfNestedContainersIsIndented) {
               "}");
 }
 
-TEST(Description, QuotesWhatIsNoSingleWordInAContainer) {
+TEST(Description, QuotesTextsOfSeveralWordsInAContainer) {
     const Value value(
         Array{Value("a\"\\"), Value(""), Value("a.b-c_/$"), Value(Date{0}), Value(Error("D", 1, "t"))});
     EXPECT_EQ(described(value),

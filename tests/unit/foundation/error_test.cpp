@@ -22,7 +22,7 @@ TEST(Error, WithoutAPathIsTheBareReason) {
     EXPECT_TRUE(Error::posix(EACCES).userInfo().empty());
 }
 
-TEST(Error, OfAnUnknownNumberStillSaysSomething) {
+TEST(Error, OfAnUnknownNumberStillHasAText) {
     EXPECT_EQ(Error::posix(987654).localizedFailureReason(), "Error 987654.");
     EXPECT_EQ(Error::osStatus(-12345).localizedFailureReason(), "Status -12345.");
     EXPECT_EQ(Error::osStatus(kParameterError).localizedFailureReason(), "A parameter was not valid.");
@@ -50,7 +50,7 @@ TEST(Result, IsAValueOrAnError) {
     EXPECT_FALSE(Result<int>(bad).asOptional());
 }
 
-TEST(Result, OfAValueTellsAnErrorFromAnErrorValue) {
+TEST(Result, DistinguishesAnErrorFromAnErrorValue) {
     const Result<Value> failed = Error("D", 1, "t");
     const Result<Value> holding = Value(Error("D", 1, "t"));
     EXPECT_FALSE(failed);

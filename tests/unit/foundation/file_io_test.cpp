@@ -51,7 +51,7 @@ TEST(SmallFile, MayBeAsLongAsTheLimitAndNotAByteLonger) {
     EXPECT_EQ(failure(directory / "f", 99), EFBIG);
 }
 
-TEST(SmallFile, IsFoundBehindALink) {
+TEST(SmallFile, IsFoundThroughALink) {
     const TemporaryDirectory directory;
     test::writeFile(directory / "f", "x");
     std::filesystem::create_symlink("f", directory / "link");
@@ -95,7 +95,7 @@ TEST(SmallFile, IsNoSocket) {
     EXPECT_EQ(failure(path), EINVAL);
 }
 
-TEST(SmallFile, IsNotNamedByWhatStandsBeforeAZeroByte) {
+TEST(SmallFile, IsNotNamedByTheTextBeforeAZeroByte) {
     const TemporaryDirectory directory;
     test::writeFile(directory / "f", "x");
     EXPECT_EQ(failure((directory / "f") + std::string("\0g", 2)), EINVAL);
@@ -105,7 +105,7 @@ bool isOpen(int number) {
     return fcntl(number, F_GETFD) >= 0;
 }
 
-TEST(FileDescriptor, ClosesWhatItOwns) {
+TEST(FileDescriptor, ClosesItsDescriptor) {
     int number = -1;
     {
         const FileDescriptor file(open("/dev/null", O_RDONLY | O_CLOEXEC));

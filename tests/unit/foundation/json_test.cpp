@@ -60,7 +60,7 @@ TEST(JSON, LetsTheLastOfEqualKeysWin) {
     EXPECT_EQ(parsed(R"({"a":1,"b":2,"a":3})")["a"], Value(3));
 }
 
-TEST(JSON, RefusesEqualKeysIfToldTo) {
+TEST(JSON, RefusesEqualKeysOnRequest) {
     const auto refused = [](std::string_view text) {
         return !parseJSON(asBytes(text), EqualKeys::refused);
     };
@@ -94,7 +94,7 @@ TEST(JSON, NamesThePositionOfAFault) {
     EXPECT_THAT(jsonRefusal(""), HasSubstr("malformed at byte 0"));
 }
 
-TEST(JSON, RefusesWhatTheStandardDoes) {
+TEST(JSON, RefusesTextsThatTheStandardRefuses) {
     for (const std::string_view text : {"[1,]",
                                         "{\"a\":1,}",
                                         "{a:1}",
@@ -166,12 +166,12 @@ TEST(JSON, EscapesTextThatItWrites) {
               "[\"\\\"\\\\\\n\\u0001\\u0000\",\"\xC3\xA9\"]");
 }
 
-TEST(JSON, ReadsBackWhatItWrote) {
+TEST(JSON, ReadsItsOwnOutput) {
     const Value value(Dictionary{{"k\n", Array{0.1, 1e300, "x", Dictionary{{"", false}}}}});
     EXPECT_EQ(parsed(written(value)), value);
 }
 
-TEST(JSON, CannotWriteWhatItCannotSay) {
+TEST(JSON, CannotWriteValuesOutsideOfItsForm) {
     EXPECT_THAT(written(Array{Value()}), HasSubstr("error: JSON cannot hold a value of this kind"));
     EXPECT_THAT(written(Array{toData("x")}), HasSubstr("error:"));
     EXPECT_THAT(written(Array{Date{1}}), HasSubstr("error:"));

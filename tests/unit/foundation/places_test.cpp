@@ -86,7 +86,7 @@ TEST_F(HeldPlaces, FindsAHeldFileInTheDirectoryThatWasOpened) {
     EXPECT_EQ(at("held/below/file"), "below");
 }
 
-TEST_F(HeldPlaces, KeepsTheDescriptorOfWhatIsHeldTwice) {
+TEST_F(HeldPlaces, KeepsTheDescriptorOfAnItemThatIsHeldTwice) {
     writeFile(path("held/file"), "held");
     auto first = places_.hold(path("held/file"));
     std::filesystem::rename(path("held"), path("moved"));
@@ -125,12 +125,12 @@ TEST_F(HeldPlaces, DoesNotTakeASiblingForSomethingBelow) {
     EXPECT_EQ(at("Held.app2/file"), "sibling");
 }
 
-TEST_F(HeldPlaces, CannotHoldWhatIsNotThere) {
+TEST_F(HeldPlaces, CannotHoldAMissingItem) {
     EXPECT_EQ(places_.hold(path("none")).error().code(), ENOENT);
     EXPECT_EQ(places_.hold(path("none/none")).error().code(), ENOENT);
 }
 
-TEST_F(HeldPlaces, HoldsALinkAsWhatItIs) {
+TEST_F(HeldPlaces, HoldsALinkItself) {
     makeDirectory(path("real"));
     makeLink("real", path("Link.app"));
     const auto anchor = places_.hold(path("Link.app"));

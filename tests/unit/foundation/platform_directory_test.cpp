@@ -77,7 +77,7 @@ TEST(PlatformHost, NamesThePositionOfASyntaxError) {
     EXPECT_THAT(hostFrom(""), HasSubstr("byte 0"));
 }
 
-TEST(PlatformHost, NamesTheEntryThatIsNotWhatItShouldBe) {
+TEST(PlatformHost, NamesTheWrongEntry) {
     EXPECT_THAT(hostFrom("[]"), HasSubstr("not an object, at byte 0"));
     EXPECT_THAT(hostFrom("5"), HasSubstr("at byte 0"));
     EXPECT_THAT(hostFrom(R"({"lumora": "h"})"), HasSubstr("lumora is not an object"));

@@ -51,7 +51,7 @@ TEST(TemporaryDirectory, IsTheSystemsOwnWhenTheEnvironmentNamesNone) {
     }
 }
 
-TEST(SecureEnvironment, TellsEmptyFromUnset) {
+TEST(SecureEnvironment, DistinguishesEmptyFromUnset) {
     const ScopedVariable empty("PINWELL_TEST_EMPTY", "");
     const ScopedVariable unset("PINWELL_TEST_UNSET", std::nullopt);
     EXPECT_EQ(secureEnvironment("PINWELL_TEST_EMPTY"), "");

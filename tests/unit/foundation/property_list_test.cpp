@@ -172,7 +172,7 @@ TEST(XMLPropertyList, RefusesUnbalancedElements) {
         EXPECT_THAT(refusal(xml(body)), HasSubstr("malformed")) << body;
 }
 
-TEST(XMLPropertyList, RefusesWhatIsNoPropertyList) {
+TEST(XMLPropertyList, RefusesOtherDocuments) {
     for (const std::string_view text :
          {"", "text", "<html></html>", "<plist></plist>", "<plist version=\"1.0\">", "<", "<?xml", "<!--",
           "<plist", "<plist><string><b/></string></plist>", "<plist><array>x</array></plist>",
@@ -449,7 +449,7 @@ TEST(BinaryPropertyList, RefusesUnknownKinds) {
             << marker;
 }
 
-TEST(BinaryPropertyList, RefusesATrailerThatLies) {
+TEST(BinaryPropertyList, RefusesAFalseTrailer) {
     const BinaryList good = BinaryList().object({0x09});
     ASSERT_EQ(parsed(good.build()), Value(true));
     EXPECT_THAT(refusal(BinaryList(good).root(1).build()), HasSubstr("no such root"));
@@ -496,7 +496,7 @@ TEST(BinaryPropertyList, SurvivesEverySingleWrongByte) {
     EXPECT_GT(refused, whole.size());
 }
 
-TEST(PropertyList, ReadsBackWhatItWrote) {
+TEST(PropertyList, ReadsItsOwnOutput) {
     const Value value(
         Dictionary{{"text", "<&>]]>\"'\xC3\xA9\n\r\t"},
                    {"numbers", Array{0, -7, std::numeric_limits<std::int64_t>::max(), 0.25, 0.1, 1e300}},
@@ -509,7 +509,7 @@ TEST(PropertyList, ReadsBackWhatItWrote) {
     EXPECT_EQ(parsed(*written), value);
 }
 
-TEST(PropertyList, CannotWriteWhatItCannotSay) {
+TEST(PropertyList, CannotWriteValuesOutsideOfItsForm) {
     for (const Value& value :
          {Value(), Value(Value::Null{}), Value(std::nan("")), Value("\xFF"), Value("\xEF\xBF\xBF"),
           Value("\x01"), Value(Array{Value()}), Value(Dictionary{{"\x1B", 1}}),

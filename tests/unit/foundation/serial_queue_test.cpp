@@ -105,7 +105,7 @@ struct LastWord {
     }
 };
 
-TEST(SerialQueue, LetsWhatWorkOwnedHandInWorkAsItGoes) {
+TEST(SerialQueue, LetsTheDestructorOfAWorksObjectAddWork) {
     int said = 0;
     {
         SerialQueue queue("owner");

@@ -44,7 +44,7 @@ TEST_F(Deferral, PassesOnNoSignalThatDidNotCome) {
     EXPECT_EQ(taken, 1);
 }
 
-TEST_F(Deferral, ForgetsWhatAnEarlierOneHasSeen) {
+TEST_F(Deferral, ForgetsTheSignalsOfAnEarlierOne) {
     {
         const SignalDeferral deferral;
         send(SIGINT);

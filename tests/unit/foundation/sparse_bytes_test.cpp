@@ -26,7 +26,7 @@ TEST(SparseBuffer, BeginsAsZeros) {
     EXPECT_EQ(foundation::toData(SparseBuffer(10'000).view()), Data(10'000));
 }
 
-TEST(SparseBuffer, HasWhatWasPutAcrossItsPages) {
+TEST(SparseBuffer, HasBytesWrittenAcrossItsPages) {
     const Data bytes = countedBytes(20'000);
     SparseBuffer buffer(30'000);
     buffer.put(4000, bytes);
@@ -35,7 +35,7 @@ TEST(SparseBuffer, HasWhatWasPutAcrossItsPages) {
     EXPECT_EQ(foundation::toData(buffer.view()), expected);
 }
 
-TEST(SparseBuffer, HasAPieceThatIsZerosButForItsLastByte) {
+TEST(SparseBuffer, HasAPieceThatIsZeroExceptItsLastByte) {
     Data bytes(9000);
     bytes.back() = std::byte{1};
     SparseBuffer buffer(9000);
@@ -43,7 +43,7 @@ TEST(SparseBuffer, HasAPieceThatIsZerosButForItsLastByte) {
     EXPECT_EQ(foundation::toData(buffer.view()), bytes);
 }
 
-TEST(SparseBuffer, TakesMemoryForWhatIsNotZero) {
+TEST(SparseBuffer, TakesMemoryOnlyForNonZeroBytes) {
     const std::size_t before = residentMemory();
     SparseBuffer buffer(std::size_t{1} << 32U);
     const Data zeros(1 << 20U);
@@ -54,7 +54,7 @@ TEST(SparseBuffer, TakesMemoryForWhatIsNotZero) {
     EXPECT_LE(residentMemory(), before + kLittleMemory);
 }
 
-TEST(SparseBuffer, RefusesWhatDoesNotFit) {
+TEST(SparseBuffer, RefusesBytesThatDoNotFit) {
     SparseBuffer buffer(100);
     EXPECT_THROW(buffer.put(91, Data(10)), std::out_of_range);
     EXPECT_THROW(buffer.put(101, {}), std::out_of_range);
@@ -83,7 +83,7 @@ TEST(SharedBytes, LiveAsLongAsAnyPart) {
               foundation::toData(ByteView(countedBytes(100)).subspan(10, 5)));
 }
 
-TEST(SharedBytes, OfABufferAreWhatWasPutThere) {
+TEST(SharedBytes, OfABufferAreItsBytes) {
     SparseBuffer buffer(10);
     buffer.put(5, countedBytes(5));
     const SharedBytes bytes = std::move(buffer);

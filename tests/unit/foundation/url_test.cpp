@@ -15,7 +15,7 @@ std::string tidied(std::string_view path) {
     return URL::fileURLWithPath(path).path();
 }
 
-TEST(FileURL, DropsWhatDoesNotChangeTheMeaning) {
+TEST(FileURL, DropsPartsWithoutAMeaning) {
     EXPECT_EQ(tidied("/a//b/"), "/a/b");
     EXPECT_EQ(tidied("/a/./b/."), "/a/b");
     EXPECT_EQ(tidied("///"), "/");

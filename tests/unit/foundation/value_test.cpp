@@ -10,7 +10,7 @@
 namespace pinwell::foundation {
 namespace {
 
-TEST(Value, AnswersAnyQuestionToNilWithNil) {
+TEST(Value, ReturnsNilForEveryAccessToNil) {
     const Value nil;
     EXPECT_TRUE(nil.isNil());
     EXPECT_TRUE(nil["a"].isNil());
@@ -18,7 +18,7 @@ TEST(Value, AnswersAnyQuestionToNilWithNil) {
     EXPECT_TRUE(Value(nullptr).isNil());
 }
 
-TEST(Value, AnswersAMissingKeyWithNil) {
+TEST(Value, ReturnsNilForAMissingKey) {
     const Value dictionary(Dictionary{{"a", Dictionary{{"b", 1}}}});
     EXPECT_EQ(dictionary["a"]["b"], Value(1));
     EXPECT_TRUE(dictionary["x"].isNil());
@@ -32,7 +32,7 @@ TEST(Value, RefusesASubscriptThatItsKindHasNot) {
     EXPECT_THROW(Value(1)[0], ValueTypeError);
 }
 
-TEST(Value, TellsAJSONNullFromNil) {
+TEST(Value, DistinguishesAJSONNullFromNil) {
     const Value null(Value::Null{});
     EXPECT_TRUE(null.isNull());
     EXPECT_FALSE(null.isNil());
@@ -100,7 +100,7 @@ TEST(Value, IsTrueWhenItIsANumberOtherThanZero) {
     EXPECT_FALSE(Value().boolValue());
 }
 
-TEST(Value, ComparesNumbersByWhatTheySay) {
+TEST(Value, ComparesNumbersByTheirValue) {
     EXPECT_EQ(Value(1), Value(1U));
     EXPECT_NE(Value(-1), Value(std::uint64_t{18446744073709551615U}));
     EXPECT_NE(Value(1), Value(true));

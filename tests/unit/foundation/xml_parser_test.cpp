@@ -79,7 +79,7 @@ TEST(XMLParser, ReadsADocumentHoweverItIsCut) {
     }
 }
 
-TEST(XMLParser, RefusesWhatIsNotWellFormed) {
+TEST(XMLParser, RefusesMalformedDocuments) {
     for (const char* document : {"",
                                  " ",
                                  "text",
@@ -105,7 +105,7 @@ TEST(XMLParser, RefusesWhatIsNotWellFormed) {
     EXPECT_NE(documentRefusal(std::string_view("<a>\0</a>", 8)), "");
 }
 
-TEST(XMLParser, SaysWhereTheFaultIs) {
+TEST(XMLParser, ReportsThePlaceOfTheFault) {
     EXPECT_EQ(parsedDocument("<a>\n<b></c></a>").offset, 9U);
 }
 
@@ -156,7 +156,7 @@ TEST(XMLParser, RefusesADocumentTypeUnlessTheCallerTakesOne) {
 }
 
 // With an unread document type, the library must assume that any entity may be declared.
-TEST(XMLParser, RefusesUndeclaredEntitiesBehindADocumentTypeToo) {
+TEST(XMLParser, RefusesUndeclaredEntitiesAfterADocumentTypeToo) {
     EXPECT_THAT(documentRefusal("<!DOCTYPE a SYSTEM 'b'><a>&c;</a>", XMLDocumentType::withoutDeclarations),
                 HasSubstr("entity"));
     EXPECT_THAT(documentRefusal("<!DOCTYPE a SYSTEM 'b'><a>&amp;</a>", XMLDocumentType::withoutDeclarations),

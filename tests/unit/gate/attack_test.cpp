@@ -183,7 +183,7 @@ TEST(PackageTable, IsRefusedForTwoEntriesOfOneFile) {
                 Contains("archived-file: d/a"));
 }
 
-TEST(PackageTable, SaysWhatItMissesOfAnEntryWithoutAChecksum) {
+TEST(PackageTable, ReportsAnEntryWithoutAChecksum) {
     const std::string data = "<data><offset>20</offset><length>4</length></data>";
     const std::vector<verify::Check> checks = checksOfTable(fileNamed("a", data));
     const auto isFault = [](const verify::Check& check) {

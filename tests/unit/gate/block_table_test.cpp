@@ -89,7 +89,7 @@ TEST(BlockTable, FindsTablesThatContradictThemselves) {
                 failsAt("block table 1"));
 }
 
-TEST(BlockTable, SaysWhatItSkips) {
+TEST(BlockTable, ReportsSkippedTables) {
     EXPECT_THAT(
         checksOf(TabledImageBuilder().block(0x80000006, 4, kSome, kSome).dataChecksum(0)),
         Contains(AllOf(is(Outcome::skipped), testing::Field(&Check::found, HasSubstr("packed in a way")))));

@@ -46,7 +46,7 @@ class PolicyFile : public testing::Test {
     const std::string path = directory / "policy.toml";
 };
 
-TEST_F(PolicyFile, AsksNothingIfItIsEmpty) {
+TEST_F(PolicyFile, RequiresNothingIfItIsEmpty) {
     for (const char* const text : {"", "\n\n", "# a remark\n", "\xEF\xBB\xBF"}) {
         const Policy policy = read(text);
         EXPECT_FALSE(policy.maximumTicketAge);
@@ -106,7 +106,7 @@ TEST_F(PolicyFile, IsRefusedIfItIsNoToml) {
     EXPECT_THAT(faultOf(std::string_view("require-team = \"A\"\n\0", 20)), StartsWith(path + ":2: "));
 }
 
-TEST_F(PolicyFile, SaysOneLineWhateverItsNamesHold) {
+TEST_F(PolicyFile, ReportsOneLineForAnyName) {
     const std::string said = faultOf("\"a\\nb\\u001b\" = 1\n");
     EXPECT_THAT(said, testing::Not(HasSubstr("\n")));
     EXPECT_THAT(said, testing::Not(HasSubstr("\x1b")));

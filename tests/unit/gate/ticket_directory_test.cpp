@@ -50,7 +50,7 @@ class FetchedTickets : public GateTest {
     const Result stapledResult;
 };
 
-TEST_F(FetchedTickets, AdmitWhatTheyList) {
+TEST_F(FetchedTickets, AdmitListedArtefacts) {
     fetch(ticketWith(payload()));
     expect(0, verify::kTicketCurrent, Outcome::passed);
 }

@@ -64,7 +64,7 @@ class ClientIdentityTest : public SessionTest {
     const std::string key = directory / "client.key";
 };
 
-TEST_F(ClientIdentityTest, IsShownToAServerThatAsks) {
+TEST_F(ClientIdentityTest, IsSentToAServerThatRequestsIt) {
     present();
     for (const TLSVersion one : {TLSVersion::tls12, TLSVersion::tls13}) {
         version = one;
@@ -81,7 +81,7 @@ TEST_F(ClientIdentityTest, IsNotShownToAServerThatDoesNotAsk) {
     EXPECT_FALSE(server.connections().at(0).presentedClientCertificate);
 }
 
-TEST_F(ClientIdentityTest, IsNotShownToAServerThatIsRefused) {
+TEST_F(ClientIdentityTest, IsNotSentToARefusedServer) {
     present();
     delegate.onChallenge = [](auto&, auto& completion) {
         completion(https::Disposition::cancelChallenge, std::nullopt);
@@ -129,12 +129,12 @@ TEST_F(ClientIdentityTest, NamesTheFileThatIsMissing) {
     EXPECT_THAT(fault(), HasSubstr(certificate));
 }
 
-TEST_F(ClientIdentityTest, SaysThatAKeyIsEncrypted) {
+TEST_F(ClientIdentityTest, ReportsAnEncryptedKey) {
     writeFile(key, encryptedPem(chain.leaf.key));
     EXPECT_EQ(fault(), "The key in " + key + " is encrypted. Keys are taken unencrypted only.");
 }
 
-TEST_F(ClientIdentityTest, SaysThatAKeyIsOfAnotherCertificate) {
+TEST_F(ClientIdentityTest, ReportsAKeyOfAnotherCertificate) {
     writeFile(key, chain.intermediate.key.pem());
     EXPECT_THAT(fault(), HasSubstr("is not that of the first certificate"));
 }
@@ -154,7 +154,7 @@ TEST_F(ClientIdentityTest, RefusesFilesThatHoldNone) {
     EXPECT_THAT(fault(), HasSubstr("Certificate number 1 in " + certificate + " cannot be read"));
 }
 
-TEST_F(ClientIdentityTest, RefusesACertificateThatIsCutBehindAGoodOne) {
+TEST_F(ClientIdentityTest, RefusesACutCertificateAfterAGoodOne) {
     writeFile(certificate, chain.leaf.pem() + chain.intermediate.pem().substr(0, 200));
     EXPECT_THAT(fault(), HasSubstr("Certificate number 2 in " + certificate + " cannot be read"));
 }

@@ -63,7 +63,7 @@ TEST_F(DataTask, MakesAHeadRequestWithoutWaitingForABody) {
     EXPECT_EQ(fetch(request).text(), "");
 }
 
-TEST_F(DataTask, MakesAHeadRequestForWhatIsLargerThanAllowed) {
+TEST_F(DataTask, MakesAHeadRequestForABodyOverTheLimit) {
     server.enqueue(Script().readRequest().send("HTTP/1.1 200 OK\r\nContent-Length: 99999999999\r\n\r\n"));
     https::Request request = get(server.url());
     request.method = "HEAD";
@@ -85,17 +85,17 @@ TEST_F(DataTask, ReadsAChunkedBodyAndDropsItsTrailer) {
     EXPECT_FALSE(outcome.response->header("Late"));
 }
 
-TEST_F(DataTask, ReadsAnHTTP10AnswerThatEndsWithTheConnection) {
+TEST_F(DataTask, ReadsAnHTTP10ResponseThatEndsWithTheConnection) {
     const Outcome outcome = fetchFrom(Script().readRequest().send("HTTP/1.0 200 OK\r\n\r\nold").close());
     EXPECT_EQ(outcome.text(), "old");
     EXPECT_EQ(outcome.status(), 200);
 }
 
-TEST_F(DataTask, ReadsADrippedAnswer) {
+TEST_F(DataTask, ReadsADrippedResponse) {
     EXPECT_EQ(fetchFrom(Script().readRequest().drip(Response{.body = "slowly"}.bytes())).text(), "slowly");
 }
 
-TEST_F(DataTask, PassesOverInterimAnswers) {
+TEST_F(DataTask, SkipsInterimResponses) {
     const Outcome outcome = fetchFrom(Script().readRequest().send(
         "HTTP/1.1 100 Continue\r\n\r\nHTTP/1.1 103 Early Hints\r\nLink: </a>\r\n\r\n" +
         Response{.status = 201, .body = "final"}.bytes()));
@@ -115,7 +115,7 @@ TEST_F(DataTask, JoinsHeadersOfOneName) {
     EXPECT_EQ(outcome.response->header("X-Part"), "a, b");
 }
 
-TEST_F(DataTask, DoesNotAnswerARequestForAPassword) {
+TEST_F(DataTask, SendsNoPasswordOnRequest) {
     const Outcome outcome = fetchFrom(Script().respond(
         {.status = 401, .headers = {{"WWW-Authenticate", "Basic realm=\"r\""}}, .body = "who?"}));
     EXPECT_EQ(outcome.status(), 401);
@@ -159,7 +159,7 @@ TEST_F(DataTask, RefusesAURLThatNamesAUserAndDoesNotRepeatThePassword) {
     EXPECT_TRUE(server.connections().empty());
 }
 
-TEST_F(DataTask, RefusesAHostThatIsNotWhatItLooksLike) {
+TEST_F(DataTask, RefusesADisguisedHost) {
     for (const char* host : {"127.1", "0x7f.0.0.1", "%6cocalhost"})
         expectFailure(fetch(server.url("/", host)), URLErrorCode::unsupportedURL, "ambiguous host");
     EXPECT_TRUE(server.connections().empty());
@@ -178,7 +178,7 @@ TEST_F(DataTask, RefusesMalformedHeadersAndMethods) {
     EXPECT_TRUE(server.connections().empty());
 }
 
-TEST_F(DataTask, NamesHostPortAndReasonWhenNobodyListens) {
+TEST_F(DataTask, NamesHostPortAndReasonWithoutAListener) {
     std::uint16_t port = 0;
     {
         const HostileServer gone(identity());

@@ -49,7 +49,7 @@ TEST_F(DownloadTask, DeliversAnEmptyFile) {
     EXPECT_EQ(download(get(server.url())).text(), "");
 }
 
-TEST_F(DownloadTask, KeepsOnlyTheBodyOfTheLastAnswer) {
+TEST_F(DownloadTask, KeepsOnlyTheBodyOfTheLastResponse) {
     server.enqueue(Script().respond({.status = 302, .headers = {{"Location", "/next"}}, .body = "moved"}));
     server.enqueue(Script().respond({.body = "ticket"}));
     EXPECT_EQ(download(get(server.url())).text(), "ticket");

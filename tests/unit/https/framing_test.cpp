@@ -64,7 +64,7 @@ TEST_F(Framing, ASpaceBeforeTheColonIsRefused) {
                       field);
 }
 
-TEST_F(Framing, AFoldedFieldThatSaysWhereTheBodyEndsIsRefused) {
+TEST_F(Framing, AFoldedFieldThatDefinesTheBodysEndIsRefused) {
     for (const char* field : {"Content-Length:\r\n 9\r\n", "Transfer-Encoding:\r\n\tchunked\r\n"})
         expectRefused(fetchFrom(Script()
                                     .readRequest()
@@ -134,13 +134,13 @@ TEST_F(Framing, AChunkOfGreatSizeIsReadUpToTheLimitOnly) {
         URLErrorCode::tooLarge, "larger than the 1000 bytes allowed");
 }
 
-TEST_F(Framing, ChunkExtensionsArePassedOver) {
+TEST_F(Framing, ChunkExtensionsAreSkipped) {
     EXPECT_EQ(
         fetchAnswer("Transfer-Encoding: chunked\r\n", "4;name=\"value\"\r\nbody\r\n0;last\r\n\r\n").text(),
         "body");
 }
 
-TEST_F(Framing, AChunkExtensionWithoutEndIsNoAnswer) {
+TEST_F(Framing, AnEndlessChunkExtensionIsRefused) {
     expectFailure(fetchFrom(Script()
                                 .readRequest()
                                 .send("HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n4;")
@@ -158,7 +158,7 @@ TEST_F(Framing, TrailersCannotChangeTheHead) {
     EXPECT_FALSE(outcome.response->header("Location"));
 }
 
-TEST_F(Framing, BytesBehindTheAnswerAreNotRead) {
+TEST_F(Framing, BytesAfterTheResponseAreNotRead) {
     EXPECT_EQ(
         fetchAnswer("Content-Length: 4\r\n", "bodyHTTP/1.1 200 OK\r\nContent-Length: 3\r\n\r\ntwo").text(),
         "body");
@@ -192,7 +192,7 @@ TEST_F(Framing, AFieldThatLooksLikeAStatusLineHidesNothing) {
     expectRefused(fetchAnswer("X-A: b\r\n" + std::string(disguise), "body"), "by itself");
 }
 
-TEST_F(Framing, AProtocolThatNobodyAskedToSwitchToIsNoAnswer) {
+TEST_F(Framing, AnUnrequestedProtocolSwitchIsRefused) {
     expectRefused(fetchFrom(Script()
                                 .readRequest()
                                 .send("HTTP/1.1 101 Switching Protocols\r\nUpgrade: other\r\n\r\nbody")

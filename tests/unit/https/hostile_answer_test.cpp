@@ -86,7 +86,7 @@ TEST_F(HostileAnswer, ResetWhileALargeBodyIsSent) {
                   URLErrorCode::connectionLost, "the connection was");
 }
 
-TEST_F(HostileAnswer, ClosedWithoutAnAnswer) {
+TEST_F(HostileAnswer, ClosedWithoutAResponse) {
     expectFailure(fetchFrom(Script().readRequest().close()), URLErrorCode::connectionLost,
                   "without an answer");
 }
@@ -224,7 +224,7 @@ TEST_F(HostileAnswer, ALargeBodyThatComesInManyPiecesIsNoSilence) {
     EXPECT_EQ(fetchFrom(Script().respond({.body = body})).text(), body);
 }
 
-TEST_F(HostileAnswer, EndlessInterimAnswers) {
+TEST_F(HostileAnswer, EndlessInterimResponses) {
     expectFailure(fetchFrom(Script().readRequest().sendEndlessly("HTTP/1.1 103 Early Hints\r\n\r\n")),
                   URLErrorCode::tooLarge, "header is larger than allowed");
 }
@@ -284,7 +284,7 @@ TEST_F(HostileAnswer, StallsWithinTheBody) {
         Script().readRequest().send("HTTP/1.1 200 OK\r\nContent-Length: 9\r\n\r\nhal").waitFor(gate));
 }
 
-TEST_F(HostileAnswer, StallsAfterAnInterimAnswer) {
+TEST_F(HostileAnswer, StallsAfterAnInterimResponse) {
     expectTimeout(Script().readRequest().send("HTTP/1.1 100 Continue\r\n\r\n").waitFor(gate));
 }
 

@@ -22,7 +22,7 @@ TEST(StatusText, IsTheClassOfAnUnregisteredNumber) {
     EXPECT_EQ(localizedStringForStatusCode(599), "server error");
 }
 
-TEST(StatusText, OfWhatIsNoStatusSaysSo) {
+TEST(StatusText, OfAnInvalidStatusReportsIt) {
     for (const int status : {-1, 0, 99, 600, 1000})
         EXPECT_EQ(localizedStringForStatusCode(status), "unknown status") << status;
 }

@@ -43,7 +43,7 @@ TEST_F(KeptConnection, CarriesADownload) {
     EXPECT_THAT(server.connections(), SizeIs(1));
 }
 
-TEST_F(KeptConnection, IsNotKeptUnlessTheSessionSaysSo) {
+TEST_F(KeptConnection, IsKeptOnlyIfTheSessionAllowsIt) {
     options.keepsConnection = false;
     server.enqueue(Script().respond(staying("one")).drain());
     server.enqueue(Script().respond(staying("two")).drain());
@@ -75,7 +75,7 @@ TEST_F(KeptConnection, EndsWithAServerThatClosesItWithoutSayingSoBefore) {
     }
 }
 
-TEST_F(KeptConnection, ThatBreaksBeforeTheAnswerIsReplacedByOneThatIsJudged) {
+TEST_F(KeptConnection, ThatBreaksBeforeTheResponseIsReplacedByAJudgedOne) {
     server.enqueue(Script().respond(staying("one")).readRequest().cut());
     server.enqueue(Script().respond({.body = "two"}));
     EXPECT_EQ(fetch(server.url()).text(), "one");
@@ -84,7 +84,7 @@ TEST_F(KeptConnection, ThatBreaksBeforeTheAnswerIsReplacedByOneThatIsJudged) {
     EXPECT_EQ(server.requests().at(2).body, "body");
 }
 
-TEST_F(KeptConnection, ThatBreaksWithinTheAnswerIsAnError) {
+TEST_F(KeptConnection, ThatBreaksWithinTheResponseIsAnError) {
     server.enqueue(Script()
                        .respond(staying("one"))
                        .readRequest()
@@ -97,7 +97,7 @@ TEST_F(KeptConnection, ThatBreaksWithinTheAnswerIsAnError) {
     EXPECT_EQ(judgements(), 2U);
 }
 
-TEST_F(KeptConnection, ThatIsCutWithinAnOpenAnswerIsAnError) {
+TEST_F(KeptConnection, ThatIsCutWithinAnOpenResponseIsAnError) {
     // The end of the connection is the end of this body, if it is an orderly one.
     server.enqueue(Script().respond(staying("one")).readRequest().send("HTTP/1.1 200 OK\r\n\r\nhalf").cut());
     EXPECT_EQ(fetch(server.url()).text(), "one");
@@ -147,7 +147,7 @@ TEST_F(KeptConnection, IsNotMadeToAServerThatIsRefused) {
     EXPECT_THAT(server.requests(), SizeIs(0));
 }
 
-TEST_F(KeptConnection, WithAnAnswerThatNobodyAskedForIsDropped) {
+TEST_F(KeptConnection, WithAnUnrequestedResponseIsDropped) {
     const std::string unasked = staying("unasked").bytes();
     const Gate sent;
     server.enqueue(Script().readRequest().send(staying("one").bytes() + unasked).drain());

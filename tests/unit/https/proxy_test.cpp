@@ -50,7 +50,7 @@ TEST_F(Proxy, DoesNotChangeWhichHostIsJudged) {
     EXPECT_THAT(delegate.events, ::testing::ElementsAre("challenge lumora.example", "completion"));
 }
 
-TEST_F(Proxy, IsNotToldTheHeadersOfTheRequest) {
+TEST_F(Proxy, DoesNotGetTheHeadersOfTheRequest) {
     const ConnectProxy proxy(server.port());
     const Variable variable("https_proxy", proxy.url());
     fetch(post("https://lumora.example/", "{}"));
@@ -88,7 +88,7 @@ TEST_F(Proxy, ThatCannotBeFoundIsAProxyFailure) {
     expectFailure(fetch("https://lumora.example/"), URLErrorCode::proxyFailed, "proxy");
 }
 
-TEST_F(Proxy, ThatDoesNotAnswerIsGivenUp) {
+TEST_F(Proxy, ThatDoesNotRespondIsGivenUp) {
     for (const char* said : {"", "HTTP/1.1 2", "HTTP/1.1 200 Connection established\r\nX-A: b\r\n",
                              "HTTP/1.1 407 Password\r\nContent-Length: 9\r\n\r\nhal"}) {
         Gate gate;

@@ -86,7 +86,7 @@ TEST_F(Redirect, DropsTheBodyOfTheRedirectItself) {
     EXPECT_EQ(fetch(server.url()).text(), "");
 }
 
-TEST_F(Redirect, LeavesSecretsBehindWhenItLeavesTheHost) {
+TEST_F(Redirect, DropsSecretsForAnotherHost) {
     HostileServer other(identity());
     other.enqueue(Script().respond({}));
     server.enqueue(Script().respond(redirect(302, other.url("/"))));
@@ -110,7 +110,7 @@ TEST_F(Redirect, RefusesTheEleventh) {
     EXPECT_EQ(server.requests().size(), 11U);
 }
 
-TEST_F(Redirect, RefusesWhatIsNotHTTPS) {
+TEST_F(Redirect, RefusesOtherSchemesThanHTTPS) {
     for (const std::string target :
          {"http://127.0.0.1/", "ftp://127.0.0.1/", "file:///etc/passwd", "data:,x"}) {
         server.enqueue(Script().respond(redirect(302, target)));
@@ -136,7 +136,7 @@ TEST_F(Redirect, RefusesRedirectsOfOtherKinds) {
     }
 }
 
-TEST_F(Redirect, WithoutATargetIsAnAnswerLikeAnyOther) {
+TEST_F(Redirect, WithoutATargetIsAResponseLikeAnyOther) {
     const Outcome outcome = fetchFrom(Script().respond({.status = 302, .body = "here"}));
     EXPECT_EQ(outcome.status(), 302);
     EXPECT_EQ(outcome.text(), "here");

@@ -44,7 +44,7 @@ class ResponseHead : public ::testing::Test {
     }
 };
 
-TEST_F(ResponseHead, IsCompleteAtTheEmptyLineOfAFinalAnswer) {
+TEST_F(ResponseHead, IsCompleteAtTheEmptyLineOfAFinalResponse) {
     EXPECT_EQ(add({"HTTP/1.1 103 Early Hints\r\n", "A: 1\r\n", "\r\n"}), Line::taken);
     EXPECT_FALSE(head.isComplete());
     EXPECT_EQ(add({"HTTP/2 204\r\n", "B:  2 \r\n", "\r\n"}), Line::taken);
@@ -95,7 +95,7 @@ TEST_F(ResponseHead, RefusesASwitchOfProtocols) {
     EXPECT_EQ(startsWith("HTTP/1.1 101 Switching Protocols\r\n"), Line::malformed);
 }
 
-TEST_F(ResponseHead, RefusesAnInterimAnswerThatNoStatusLineFollows) {
+TEST_F(ResponseHead, RefusesAnInterimResponseWithoutAFollowingStatusLine) {
     EXPECT_EQ(add({"HTTP/1.1 103 Early Hints\r\n", "\r\n", "A: 1\r\n"}), Line::malformed);
 }
 
@@ -104,12 +104,12 @@ TEST_F(ResponseHead, UnfoldsALine) {
     EXPECT_EQ(head.headers(), (Headers{{"A", "1 2"}}));
 }
 
-TEST_F(ResponseHead, RefusesAFoldedLineBehindNoField) {
+TEST_F(ResponseHead, RefusesAFoldedLineWithoutAField) {
     EXPECT_EQ(add({"HTTP/1.1 200 OK\r\n", " folded nowhere\r\n"}), Line::malformed);
 }
 
 // A library that does not unfold sees an empty value, and reads the body by other rules.
-TEST_F(ResponseHead, RefusesToUnfoldWhatTheTransferLibraryActsOn) {
+TEST_F(ResponseHead, RefusesToUnfoldFieldsThatTheTransferLibraryUses) {
     for (const char* field :
          {"Content-Length:\r\n", "content-length: 4\r\n", "Transfer-Encoding:\r\n", "Location: /\r\n"}) {
         head = https::ResponseHead(100, 3);
@@ -162,7 +162,7 @@ TEST_F(ResponseHead, RefusesALineOneByteTooLong) {
     EXPECT_EQ(large.addLine(line(https::kMaximumHeaderLine + 1)), Line::tooLarge);
 }
 
-TEST_F(ResponseHead, TellsTheLengthOfTheBody) {
+TEST_F(ResponseHead, ReturnsTheLengthOfTheBody) {
     EXPECT_EQ(headOf({"Content-Length: 12\r\n"}).bodyLength("GET"), 12U);
     EXPECT_EQ(headOf({"Content-Length: 0012\r\n"}).bodyLength("GET"), 12U);
     EXPECT_EQ(headOf({"Content-Length: 12, 12\r\n"}).bodyLength("GET"), 12U);
@@ -173,13 +173,13 @@ TEST_F(ResponseHead, TellsTheLengthOfTheBody) {
               std::nullopt);
 }
 
-TEST_F(ResponseHead, TellsThatThereIsNoBody) {
+TEST_F(ResponseHead, ReturnsZeroWithoutABody) {
     EXPECT_EQ(headOf({"Content-Length: 12\r\n"}).bodyLength("HEAD"), 0U);
     EXPECT_EQ(headOf({"Content-Length: 12\r\n"}, "HTTP/1.1 304 Not Modified\r\n").bodyLength("GET"), 0U);
     EXPECT_EQ(headOf({}, "HTTP/1.1 204 No Content\r\n").bodyLength("GET"), 0U);
 }
 
-TEST_F(ResponseHead, HasAnOpenEndWhenNothingTellsWhereTheBodyEnds) {
+TEST_F(ResponseHead, HasAnOpenEndIfNothingDefinesTheBodysEnd) {
     EXPECT_TRUE(headOf({}).hasOpenEnd("GET"));
     EXPECT_FALSE(headOf({}).hasOpenEnd("HEAD"));
     EXPECT_FALSE(headOf({"Content-Length: 0\r\n"}).hasOpenEnd("GET"));

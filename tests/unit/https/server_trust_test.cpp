@@ -74,12 +74,12 @@ TEST_F(ServerTrustChallenge, RefusesACredentialForAnotherTrustObject) {
     expectRefused(fetch(server.url()));
 }
 
-TEST_F(ServerTrustChallenge, RefusesWhenTheDelegateDoesNotAnswer) {
+TEST_F(ServerTrustChallenge, RefusesIfTheDelegateDoesNotDecide) {
     delegate.onChallenge = [](auto&, auto&) {};
     expectRefused(fetch(server.url()));
 }
 
-TEST_F(ServerTrustChallenge, IgnoresAnAnswerThatComesTooLate) {
+TEST_F(ServerTrustChallenge, IgnoresALateDecision) {
     https::ChallengeCompletion kept;
     std::shared_ptr<trust::Trust> object;
     delegate.onChallenge = [&](auto& challenge, auto& completion) {
@@ -90,7 +90,7 @@ TEST_F(ServerTrustChallenge, IgnoresAnAnswerThatComesTooLate) {
     kept(Disposition::useCredential, https::Credential{object});
 }
 
-TEST_F(ServerTrustChallenge, CountsTheFirstAnswerOnly) {
+TEST_F(ServerTrustChallenge, CountsOnlyTheFirstDecision) {
     delegate.onChallenge = [](auto& challenge, auto& completion) {
         completion(Disposition::cancelChallenge, std::nullopt);
         completion(Disposition::useCredential, https::Credential{challenge.serverTrust});
@@ -128,7 +128,7 @@ TEST_F(ServerTrustChallenge, StartsFromAPolicyForThatHostAndThePlatformsAnchors)
     EXPECT_EQ(trust.policies[0]->options.count(trust::option::kPlatformAnchor), 1U);
 }
 
-TEST_F(ServerTrustChallenge, IsPutForEveryConnectionAlsoWhenTheServerOffersResumption) {
+TEST_F(ServerTrustChallenge, IsMadeForEveryConnectionEvenIfTheServerOffersResumption) {
     for (const TLSVersion version : {TLSVersion::tls12, TLSVersion::tls13}) {
         HostileServer tickets(identity(), {.maximum = version});
         fetch(tickets.url());
@@ -154,7 +154,7 @@ TEST_F(ServerTrustChallenge, AcceptsTLS12) {
     EXPECT_EQ(old.connections().at(0).version, "TLSv1.2");
 }
 
-TEST_F(ServerTrustChallenge, IsNotPutForAServerThatSpeaksOlderTLSOnly) {
+TEST_F(ServerTrustChallenge, IsNotMadeForAServerWithOnlyOlderTLS) {
     HostileServer old(identity(), {.minimum = TLSVersion::tls10, .maximum = TLSVersion::tls11});
     expectFailure(fetch(old.url()), URLErrorCode::secureConnectionFailed, "the TLS handshake failed");
     EXPECT_THAT(delegate.events, ElementsAre("completion"));
@@ -174,7 +174,7 @@ TEST_F(ServerTrustChallenge, SendsTheHostNameInTheHandshake) {
 
 // The transfer library reads SSLKEYLOGFILE once in a process, so this test is most useful alone, as under
 // ctest.
-TEST_F(ServerTrustChallenge, WritesNoSessionKeysOutWhateverTheEnvironmentSays) {
+TEST_F(ServerTrustChallenge, WritesNoSessionKeysInAnyEnvironment) {
     const std::string keys = directory / "keys";
     ::setenv("SSLKEYLOGFILE", keys.c_str(), 1);
     EXPECT_EQ(fetch(server.url()).status(), 404);

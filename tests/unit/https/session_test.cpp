@@ -149,7 +149,7 @@ class EndedSession : public SessionTest {
     }
 };
 
-TEST_F(EndedSession, CancelsWhatIsRunning) {
+TEST_F(EndedSession, CancelsRunningTasks) {
     Gate gate;
     server.enqueue(Script().readRequest().waitFor(gate));
     auto own = *service->ephemeralSession(delegate);
@@ -161,7 +161,7 @@ TEST_F(EndedSession, CancelsWhatIsRunning) {
     EXPECT_THAT(error->localizedFailureReason(), ::testing::HasSubstr("the session was ended"));
 }
 
-TEST_F(EndedSession, CancelsWhatHasNotHadItsTurn) {
+TEST_F(EndedSession, CancelsWaitingTasks) {
     Gate gate;
     server.enqueue(Script().waitFor(gate));
     auto own = *service->ephemeralSession(delegate);
@@ -184,7 +184,7 @@ TEST_F(EndedSession, StartsNothingAnyMore) {
     EXPECT_FALSE(error);
 }
 
-TEST(SessionService, SaysThatThereIsNoThreadToBeHad) {
+TEST(SessionService, ReportsThatNoThreadCanBeStarted) {
     const auto check = [] {
         // The limit does not hold for the superuser.
         if (isSuperuser() && setresuid(65534, 65534, 65534) != 0) _exit(2);

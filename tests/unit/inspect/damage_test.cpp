@@ -118,7 +118,7 @@ TEST_F(DamagedTicket, OfNoLengthAtAllIsDescribed) {
     EXPECT_EQ(inspect::firstFaultOf(ticket)->rule, "the container ends inside its header");
 }
 
-TEST_F(DamagedTicket, OfRandomBytesIsDescribedWhenItsNameSaysTicket) {
+TEST_F(DamagedTicket, OfRandomBytesIsDescribedIfItsNameEndsInTicket) {
     const std::string noise = foundation::toString(irregularData(5000));
     const Report report = inspect(write("noise.ticket", noise));
     EXPECT_EQ(report.kind, Kind::ticket);
@@ -218,7 +218,7 @@ TEST_F(DamagedPlace, IsGoodExactlyWhenTheToolAcceptsTheStapledTicket) {
     compare(image, imageEnd - 512 + 296, imageEnd - 512 + 312);
 }
 
-TEST_F(DamagedPlace, ACodeDirectoryThatCannotBeReadIsSaidToBeSo) {
+TEST_F(DamagedPlace, AnUnreadableCodeDirectoryIsReported) {
     const std::string path = platform.directory / "Broken.app";
     const Data broken = CodeDirectoryBuilder().version(0x10000).build();
     BundleBuilder()

@@ -60,7 +60,7 @@ TEST_F(Inspection, OfAStapledBundleFindsAllOfIt) {
     EXPECT_EQ(report.fault, std::nullopt);
 }
 
-TEST_F(Inspection, OfAnUnstapledBundleSaysSo) {
+TEST_F(Inspection, OfAnUnstapledBundleReportsIt) {
     const Report report = inspect(bundle());
     EXPECT_EQ(report.outcome, Outcome::noTicket);
     EXPECT_EQ(report.conclusion, "No ticket is stapled to this file.");
@@ -68,14 +68,14 @@ TEST_F(Inspection, OfAnUnstapledBundleSaysSo) {
     EXPECT_EQ(report.recordName, "2/2/" + toHex(bundleHash));
 }
 
-TEST_F(Inspection, OfARevokedTicketSaysSo) {
+TEST_F(Inspection, OfARevokedTicketReportsIt) {
     const Report report = inspect(bundle(sealed(bundlePayload().revoked())));
     EXPECT_EQ(report.outcome, Outcome::revoked);
     EXPECT_TRUE(report.ticket->payload->isRevoked);
     EXPECT_EQ(report.conclusion, "The ticket is genuine, and it marks the software as revoked.");
 }
 
-TEST_F(Inspection, OfATicketForOthersSaysThatItListsNotThisFile) {
+TEST_F(Inspection, OfATicketForOthersReportsThatThisFileIsNotListed) {
     const Report report = inspect(bundle(sealed(TicketPayloadBuilder().entry(2, hashOf(1)))));
     EXPECT_EQ(report.outcome, Outcome::refused);
     EXPECT_EQ(report.conclusion, "The ticket is genuine, but it does not list this file.");
@@ -101,7 +101,7 @@ TEST_F(Inspection, OfAnUnsignedBundleSaysThatNoTicketCanListIt) {
     EXPECT_EQ(report.fault->rule, "the file has no valid signature, so no ticket can list it");
 }
 
-TEST_F(Inspection, OfSeveralSlicesShowsEachAndWhichStandsForAll) {
+TEST_F(Inspection, OfSeveralSlicesShowsEachAndMarksTheMainOne) {
     const Data x86 = CodeDirectoryBuilder().identifier("x86").covers(2, emptyRequirements()).build();
     const Data arm = CodeDirectoryBuilder().identifier("arm").covers(2, emptyRequirements()).build();
     const auto image = [](const Data& directory, std::uint32_t type) {
@@ -159,7 +159,7 @@ TEST_F(Inspection, OfASignedImageShowsTheTableOfItsSuperblob) {
     EXPECT_EQ(report.ticket->size, ticket.size());
 }
 
-TEST_F(Inspection, OfAnUnsignedImageSaysThatItsHashIsMadeUp) {
+TEST_F(Inspection, OfAnUnsignedImageReportsThatItsHashIsSynthetic) {
     const Artefact image = unsignedImage();
     const Report before = inspect(write(image.name, image.contents));
     EXPECT_EQ(before.outcome, Outcome::noTicket);
@@ -228,7 +228,7 @@ TEST_F(Inspection, OfAnExecutableSaysThatItHasNoPlaceForATicket) {
     EXPECT_EQ(report.conclusion, "An executable outside a bundle has no place for a ticket.");
 }
 
-TEST_F(Inspection, OfWhatCarriesNoTicketSaysSo) {
+TEST_F(Inspection, OfAnArtefactWithoutATicketReportsIt) {
     const Report text = inspect(write("notes.txt", "hello"));
     EXPECT_EQ(text.outcome, Outcome::unreadable);
     EXPECT_EQ(text.conclusion, "This is nothing that carries a ticket.");
@@ -248,14 +248,14 @@ TEST_F(Inspection, OfAFileThatCannotBeOpenedSaysWhyNot) {
     EXPECT_EQ(report.conclusion, "The file cannot be read: Permission denied.");
 }
 
-TEST_F(Inspection, OfAPackageThatIsADirectorySaysSo) {
+TEST_F(Inspection, OfAPackageThatIsADirectoryReportsIt) {
     makeDirectory(platform.directory / "Old.pkg");
     const Report report = inspect(platform.directory / "Old.pkg");
     EXPECT_EQ(report.outcome, Outcome::unreadable);
     EXPECT_EQ(report.conclusion, "A package that is a directory carries no ticket.");
 }
 
-TEST_F(Inspection, OfAnImageFindsTheTicketBehindMoreBlobsThanItDescribes) {
+TEST_F(Inspection, OfAnImageFindsTheTicketAfterMoreBlobsThanItDescribes) {
     const Artefact image = unsignedImage();
     SuperBlobBuilder superblob;
     for (std::uint32_t i = 0; i < codesign::kMaximumBlobsDescribed + 1; ++i)
@@ -311,7 +311,7 @@ TEST_F(Inspection, OfALeafWithoutItsMarkerNamesTheLeaf) {
     EXPECT_EQ(report.fault->offset, report.ticket->certificates[0].range.offset);
 }
 
-TEST_F(Inspection, KeepsOnlySoManyEntriesAndTheOneThatMatches) {
+TEST_F(Inspection, KeepsALimitedNumberOfEntriesAndTheMatchingOne) {
     TicketPayloadBuilder payload;
     for (std::size_t i = 0; i < inspect::kMaximumEntriesKept + 5; ++i) payload.entry(2, hashOf(3));
     const Report report = inspect(bundle(sealed(payload.entry(2, bundleHash))));
@@ -321,7 +321,7 @@ TEST_F(Inspection, KeepsOnlySoManyEntriesAndTheOneThatMatches) {
     EXPECT_EQ(report.ticket->payload->matchingEntry->index, inspect::kMaximumEntriesKept + 5);
 }
 
-TEST_F(Inspection, ChangesNothingAndAsksNobody) {
+TEST_F(Inspection, ChangesNothingAndSendsNoRequest) {
     const Artefact image = signedImage();
     const Artefact package = signedPackage();
     inspect(bundle(sealed(bundlePayload())));

@@ -49,7 +49,7 @@ TEST_F(Page, PutsEveryValueIntoOneColumn) {
     }
 }
 
-TEST_F(Page, SaysWhereTheFirstFaultIs) {
+TEST_F(Page, ShowsThePlaceOfTheFirstFault) {
     const Artefact image = unsignedImage();
     Data ticket = ticketFor(image);
     ticket[4] = std::byte{9};

@@ -160,7 +160,7 @@ TEST_F(CInterface, JudgesATicketAlikeAtEveryTime) {
     }
 }
 
-TEST_F(CInterface, EscapesWhatIsNotForATerminal) {
+TEST_F(CInterface, EscapesCharactersThatDriveATerminal) {
     const std::string path = directory / "\x1b[31m.dmg";
     writeFile(path, std::string("x"));
     pinwell_ticket* ticket = nullptr;
@@ -231,7 +231,7 @@ TEST_F(CInterface, RecognisesAHandleOfAnotherType) {
     pinwell_result_free(result);
 }
 
-TEST_F(CInterface, KeepsWhatItNeedsOfRootsThatWereFreed) {
+TEST_F(CInterface, KeepsTheNeededPartsOfFreedRoots) {
     CRoots temporary = cRoots(VectorArtefacts::platform());
     const CResult found = judged(kSample, temporary);
     temporary.reset();
@@ -255,7 +255,7 @@ TEST_F(CInterface, NeedsAPlaceForEachHandle) {
 
 // Roots.
 
-TEST_F(CInterface, TakesRootsFromPemAndSaysWhatIsNone) {
+TEST_F(CInterface, TakesRootsFromPemAndReportsOtherText) {
     const std::string pem = readFile(VectorArtefacts::platform() + "/roots/sample.pem");
     pinwell_roots* made = nullptr;
     ASSERT_EQ(pinwell_roots_from_certificates(pem.data(), pem.size(), &made, &error), PINWELL_OK);

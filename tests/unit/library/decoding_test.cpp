@@ -104,7 +104,7 @@ TEST(TicketLibraryPayload, HasItsFieldsAndItsEntries) {
     EXPECT_EQ(second->hash, hashOf(9));
 }
 
-TEST(TicketLibraryPayload, HasNoEntryBehindTheLast) {
+TEST(TicketLibraryPayload, HasNoEntryAfterTheLast) {
     const Data bytes = samplePayload();
     const auto result = ticket::decodePayload(bytes);
     const auto& payload = std::get<ticket::Payload>(result);

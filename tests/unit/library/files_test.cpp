@@ -91,7 +91,7 @@ TEST_F(FindingATicket, TakesTheLastOfTwoTicketsInAnImage) {
     EXPECT_EQ(image().ticket->bytes, toData(asBytes("second")));
 }
 
-TEST_F(FindingATicket, RefusesWhatIsNoImageWithRuleAndOffset) {
+TEST_F(FindingATicket, RefusesOtherFilesThanImagesWithRuleAndOffset) {
     put(DiskImageBuilder().magic("kolx"));
     EXPECT_EQ(imageRefusal().code, ticket::ErrorCode::malformed);
     EXPECT_EQ(imageRefusal().offset, size - 512);
@@ -153,7 +153,7 @@ TEST_F(FindingATicket, WalksToTheTerminatorOfAPackageWithoutATicket) {
     EXPECT_FALSE(package().ticket);
 }
 
-TEST_F(FindingATicket, FindsNoTrailersBehindABareArchiveOrInAnEmptyFile) {
+TEST_F(FindingATicket, FindsNoTrailersAfterABareArchiveOrInAnEmptyFile) {
     put(PackageBuilder());
     EXPECT_TRUE(package().trailers.empty());
     EXPECT_FALSE(package().hasTerminator);
@@ -186,7 +186,7 @@ TEST_F(FindingATicket, ReadsAPackageByDescriptorWithoutMovingIt) {
     EXPECT_EQ(lseek(descriptor.get(), 0, SEEK_CUR), 0);
 }
 
-TEST_F(FindingATicket, RefusesWhatIsNoRegularFileWithItsErrno) {
+TEST_F(FindingATicket, RefusesASpecialFileWithItsErrno) {
     const auto errorOf = [](const std::string& item) {
         const auto error = std::get<ticket::Error>(ticket::readDiskImage(item));
         EXPECT_EQ(error.code, ticket::ErrorCode::unreadable);

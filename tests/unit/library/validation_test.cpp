@@ -71,7 +71,7 @@ TEST_F(Judging, FindsAnyOfSeveralHashes) {
     EXPECT_FALSE(ticket::validate(sound, roots, kNow).isListed);
 }
 
-TEST_F(Judging, TellsAGenuineTicketOfAnotherArtefactFromAForgery) {
+TEST_F(Judging, DistinguishesAGenuineTicketOfAnotherArtefactFromAForgery) {
     const Data other = hashOf(99);
     const ByteView cdhashes[] = {other};
     const Validation validation = ticket::validate(sound, roots, kNow, cdhashes);

@@ -78,7 +78,7 @@ class Artefacts : public testing::Test {
 
 // Staples.
 
-TEST_F(Artefacts, AStapleAsksForARecordAndWritesItsTicket) {
+TEST_F(Artefacts, AStapleLooksUpARecordAndWritesItsTicket) {
     ArtefactRun run = made(kOperationStaple);
     EXPECT_EQ(run.begin(), std::nullopt);
     EXPECT_EQ(run.recordName(), "2/2/66697273742e2e2e2e2e2e2e2e2e2e2e2e2e2e2e");
@@ -88,7 +88,7 @@ TEST_F(Artefacts, AStapleAsksForARecordAndWritesItsTicket) {
     EXPECT_EQ(run.messages().back(), "The staple and validate action worked!");
 }
 
-TEST_F(Artefacts, AStapleEndsAsItsAnswerSays) {
+TEST_F(Artefacts, AStapleEndsAccordingToItsResponse) {
     struct Row {
         Answer answer;
         int exitStatus;
@@ -139,7 +139,7 @@ TEST_F(Artefacts, ARunThatWasReleasedReadsAgain) {
     EXPECT_THAT(run.end(answered(ticket)), Ended(0, Cause::worked));
 }
 
-TEST_F(Artefacts, WhatHasAnotherHashByThenIsToBeLookedUpAgain) {
+TEST_F(Artefacts, AnArtefactWithAnotherHashByThenIsLookedUpAgain) {
     ArtefactRun run = made(kOperationStaple);
     ASSERT_EQ(run.begin(), std::nullopt);
     writeBundle(path, "second");
@@ -150,7 +150,7 @@ TEST_F(Artefacts, WhatHasAnotherHashByThenIsToBeLookedUpAgain) {
                 Ended(0, Cause::worked));
 }
 
-TEST_F(Artefacts, WhatIsGoneByThenIsNotReadable) {
+TEST_F(Artefacts, AnArtefactRemovedByThenIsUnreadable) {
     ArtefactRun run = made(kOperationStaple);
     ASSERT_EQ(run.begin(), std::nullopt);
     std::filesystem::remove_all(path);
@@ -206,7 +206,7 @@ TEST_F(Artefacts, AttachingTakesTheTicketOfTheRecord) {
     EXPECT_EQ(stapled(), foundation::toString(ticket));
 }
 
-TEST_F(Artefacts, AttachingTellsATicketThatIsNotThereFromOneThatCannotBeRead) {
+TEST_F(Artefacts, AttachingDistinguishesAMissingTicketFromAnUnreadableOne) {
     const auto causeAfter = [&](int code) {
         return made(kOperationStaple)
             .attach([code](const std::string& name) -> foundation::Result<foundation::Data> {

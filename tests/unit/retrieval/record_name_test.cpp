@@ -23,7 +23,7 @@ TEST(RecordName, HoldsAHash) {
     EXPECT_TRUE(hashInRecordName("2/1/" + std::string(128, '9')));
 }
 
-TEST(RecordName, ReturnsNulloptForWhatIsNone) {
+TEST(RecordName, ReturnsNulloptForOtherText) {
     for (const std::string& name : {std::string(),
                                     std::string("2"),
                                     std::string("2/"),

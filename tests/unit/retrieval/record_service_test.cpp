@@ -83,7 +83,7 @@ class Lookup : public testing::Test {
 
 // Groups.
 
-TEST_F(Lookup, OfManyNamesIsOneRequestWhoseAnswersAreToldApart) {
+TEST_F(Lookup, OfManyNamesIsOneRequestWithSeparateResults) {
     const Names names = namesUpTo(retrieval::kNamesPerRequest);
     const auto answers = lookUp(names);
     expectRightAnswers(answers, names);
@@ -94,7 +94,7 @@ TEST_F(Lookup, OfManyNamesIsOneRequestWhoseAnswersAreToldApart) {
     EXPECT_THAT(identifiers, AllOf(SizeIs(names.size()), Each(StartsWith("REQUEST-"))));
 }
 
-TEST_F(Lookup, OfNothingAsksNobody) {
+TEST_F(Lookup, OfNothingSendsNoRequest) {
     EXPECT_THAT(lookUp({}), IsEmpty());
     EXPECT_THAT(sessions.requests(), IsEmpty());
 }
@@ -120,7 +120,7 @@ struct OtherAnswer {
 
 class LookupOfAGroup : public Lookup, public testing::WithParamInterface<OtherAnswer> {};
 
-TEST_P(LookupOfAGroup, AsksOneByOneWhereOthersWereAnsweredAndDoesNotAskForGroupsAgain) {
+TEST_P(LookupOfAGroup, LooksUpOneByOneIfThatSucceededAndSendsNoMoreGroups) {
     sessions.answerBy([](const https::Request& request) {
         const Names names = AnsweringSessions::namesIn(request);
         return recordsOf(names.size() == 1 ? names : GetParam().change(names));
@@ -162,7 +162,7 @@ INSTANTIATE_TEST_SUITE_P(Answered, LookupOfAGroup,
                                          OtherAnswer{"NotAtAll", [](const Names&) { return Names(); }}),
                          [](const auto& row) { return row.param.title; });
 
-TEST_F(Lookup, TriesGroupsAgainAfterAnAnswerWithoutRecords) {
+TEST_F(Lookup, TriesGroupsAgainAfterAResponseWithoutRecords) {
     const Names names = namesUpTo(3);
     for (const char* body : {"no JSON", "{}", R"({"records":1})", "[]"}) {
         sessions.answerBy([body](const https::Request& request) {
@@ -213,7 +213,7 @@ TEST_F(Lookup, ReadsRetryAfterAsSecondsOrAsADate) {
         EXPECT_EQ(retryAfter(text), std::nullopt) << text;
 }
 
-TEST_F(Lookup, AnAnswerWithoutABodyIsNone) {
+TEST_F(Lookup, AResponseWithoutABodyIsNone) {
     sessions.answerBy([](const https::Request&) { return Reply{.status = 200}; });
     const Answer answer = lookUp({"2/2/a"}).at(0);
     EXPECT_THAT(answer, HasKind(Answer::Kind::unreachable));
@@ -227,7 +227,7 @@ TEST_F(Lookup, WithoutASessionIsUnreachable) {
     EXPECT_THAT(lookUp(namesUpTo(3)), AllOf(SizeIs(3), Each(HasKind(Answer::Kind::unreachable))));
 }
 
-TEST_F(Lookup, AServerThatWasRefusedIsAskedForNoFurtherName) {
+TEST_F(Lookup, ARefusedServerGetsNoFurtherLookup) {
     sessions.answerBy([](const https::Request&) { return Reply{.isByAStranger = true}; });
     EXPECT_THAT(lookUp(namesUpTo(3)), AllOf(SizeIs(3), Each(HasKind(Answer::Kind::untrusted))));
     EXPECT_THAT(sessions.requests(), SizeIs(1));
@@ -240,7 +240,7 @@ TEST_F(Lookup, AServerThatWasRefusedIsAskedForNoFurtherName) {
     EXPECT_THAT(sessions.requests(), SizeIs(testing::Le(2 + retrieval::kConnectionsPerCall)));
 }
 
-TEST_F(Lookup, AServiceThatFailsNameByNameIsNotAskedForAllOfThem) {
+TEST_F(Lookup, AServiceThatFailsNameByNameGetsNoLookupForAllOfThem) {
     sessions.answerBy([](const https::Request& request) {
         return AnsweringSessions::namesIn(request).size() > 1 ? Reply{.body = "{}"} : Reply{.status = 503};
     });

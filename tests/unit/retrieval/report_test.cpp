@@ -27,12 +27,12 @@ Report reportOf(Cause cause, int status) {
             .file = std::nullopt};
 }
 
-TEST(ReportAsText, IsTheLastThingThatTheToolSays) {
+TEST(ReportAsText, IsTheLastMessageOfTheTool) {
     EXPECT_EQ(asText(reportOf(Cause::notIssued, 65), false, false), "a.dmg: the last words (notIssued)");
     EXPECT_EQ(asText(reportOf(Cause::worked, 0), false, false), "a.dmg: the last words");
 }
 
-TEST(ReportAsText, IsMadeUpWhereTheToolWouldHaveSaidNothing) {
+TEST(ReportAsText, HasItsOwnTextIfTheToolWouldPrintNothing) {
     Report report = reportOf(Cause::timedOut, 68);
     report.messages.clear();
     EXPECT_EQ(asText(report, false, false),
@@ -49,7 +49,7 @@ TEST(ReportAsText, HoldsNoControlCharactersOfAPath) {
     EXPECT_THAT(asText(report, false, false), Not(HasSubstr("\n")));
 }
 
-TEST(ReportAsText, IsColouredOnlyIfItIsToldTo) {
+TEST(ReportAsText, IsColouredOnlyOnRequest) {
     EXPECT_THAT(asText(reportOf(Cause::worked, 0), false, true), HasSubstr("\x1b[32m"));
     EXPECT_THAT(asText(reportOf(Cause::revoked, 77), false, true), HasSubstr("\x1b[31m"));
     EXPECT_THAT(asText(reportOf(Cause::revoked, 77), false, false), Not(HasSubstr("\x1b")));
@@ -70,7 +70,7 @@ TEST(ReportAsJson, IsOneLineWhateverThePathHolds) {
     EXPECT_EQ(*(*document)["path"].string(), "a\n\"\\\xef\xbf\xbd\x01");
 }
 
-TEST(ReportAsJson, HasNullForWhatIsNotKnown) {
+TEST(ReportAsJson, HasNullForUnknownValues) {
     Report report;
     report.operation = "fetch";
     EXPECT_EQ(

@@ -101,7 +101,7 @@ class Request : public testing::Test {
 
 // The request.
 
-TEST_F(Request, SaysWhatTheTicketIsToListAndWhatItIsFor) {
+TEST_F(Request, HasTheTicketsHashesAndItsLabel) {
     TicketWish wish = wishFor(1);
     wish.hashes.push_back({4, Data(48, std::byte{2})});
     wish.label = "My \"App\"";
@@ -115,7 +115,7 @@ TEST_F(Request, SaysWhatTheTicketIsToListAndWhatItIsFor) {
                   R"("],"label":"My \"App\"","record":")" + nameOf(1) + "\"}");
 }
 
-TEST_F(Request, SaysToReinstateAndWhyOnlyIfAsked) {
+TEST_F(Request, ReinstatesWithACommentOnlyOnRequest) {
     TicketWish wish = wishFor(1);
     wish.reinstates = true;
     wish.comment = "built anew";
@@ -137,7 +137,7 @@ TEST_F(Request, ThatCannotBeWrittenIsNotSent) {
     expectEnd(request(wish), Cause::notIssued, 65, 0);
 }
 
-TEST_F(Request, HasAKeyThatNoOtherOneHasAndEachTryHas) {
+TEST_F(Request, HasAUniqueKeyThatAllItsTriesShare) {
     answer(problem(503, "later", {{"Retry-After", "0"}}));
     TicketRequests all = requests();
     all.request(wishFor(1));
@@ -266,7 +266,7 @@ TEST_P(WrongRequestAnswer, IsRefused) {
 INSTANTIATE_TEST_SUITE_P(Requests, WrongRequestAnswer, testing::ValuesIn(WrongRequestAnswer::all()),
                          [](const auto& one) { return one.param.title; });
 
-TEST_F(Request, ShowsWhatTheServiceSaysIsWrong) {
+TEST_F(Request, ShowsTheServicesDescriptionOfTheProblem) {
     for (const int status : {400, 401, 403, 404, 411, 413, 415, 422}) {
         answer(problem(status, "the role issue is missing\\u001b[2J"));
         const RequestedTicket result = request(wishFor(1));
@@ -278,7 +278,7 @@ TEST_F(Request, ShowsWhatTheServiceSaysIsWrong) {
     }
 }
 
-TEST_F(Request, ShowsPartOfWhatIsLong) {
+TEST_F(Request, ShowsPartOfALongDescription) {
     std::string detail;
     for (int i = 0; i < 100'000; ++i) detail += "\xC3\xA4";
     answer(problem(403, detail));
@@ -288,7 +288,7 @@ TEST_F(Request, ShowsPartOfWhatIsLong) {
     EXPECT_THAT(messages[0], AllOf(testing::EndsWith("\xC3\xA4..."), Not(HasSubstr("\\"))));
 }
 
-TEST_F(Request, ShowsNothingOfWhatIsNoProblem) {
+TEST_F(Request, ShowsNothingOfABodyThatIsNoProblem) {
     for (const std::string& body :
          {std::string("<html>"), std::string("[]"), std::string("{\"detail\":1}")}) {
         Reply reply = problem(403, "");
@@ -307,7 +307,7 @@ TEST_F(Request, AboutARevokedRecordEndsAsRevoked) {
 
 // Trying again.
 
-TEST_F(Request, IsRepeatedWhileTheServiceAsksForIt) {
+TEST_F(Request, IsRepeatedAtTheServicesRequest) {
     for (const int status : {408, 429, 502, 503, 504}) {
         int tries = 0;
         sessions.answerBy([&](const https::Request&) {
@@ -341,7 +341,7 @@ TEST_F(Request, IsNotRepeatedMoreOftenThanAllowed) {
     expectEnd(request(wishFor(1)), Cause::unreachable, 68, 4);
 }
 
-TEST_F(Request, IsNotRepeatedAfterWhatAnotherTryCannotCure) {
+TEST_F(Request, IsNotRepeatedAfterAFinalFailure) {
     using Code = https::URLErrorCode;
     std::size_t sent = 0;
     for (const Code code : {Code::tooManyRedirects, Code::tooLarge, Code::badServerResponse,

@@ -366,7 +366,7 @@ TEST_F(ConfinedService, GainsNoPrivileges) {
 
 using KernelWithoutAFacility = Confined;
 
-TEST_F(KernelWithoutAFacility, LeavesFilesAsTheyWereAndSaysSo) {
+TEST_F(KernelWithoutAFacility, LeavesFilesUnconfinedAndReportsIt) {
     const Outcome outcome = whenConfinedWithout(Missing::landlock, reading(),
                                                 [&] { return opening(directory / "other/file", O_RDWR); });
     EXPECT_EQ(outcome.said, "Landlock is not in force: Function not implemented\n");
@@ -400,7 +400,7 @@ TEST_F(KernelWithoutAFacility, StillKeepsAReaderFromWriting) {
     EXPECT_THAT(whenConfinedWithout(Missing::landlock, confinement, around).result, refused);
 }
 
-TEST(CoreDumps, AreForbiddenForGood) {
+TEST(CoreDumps, AreForbiddenForEver) {
     const pid_t child = fork();
     if (child == 0) {
         sandbox::forbidCoreDumps();

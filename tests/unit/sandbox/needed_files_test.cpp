@@ -85,7 +85,7 @@ class NameServices : public testing::Test {
     TemporaryDirectory directory;
 };
 
-TEST_F(NameServices, ThatAreKnownReadWhatTheyNeed) {
+TEST_F(NameServices, ThatAreKnownReadTheirFiles) {
     for (const char* const line :
          {"hosts: files dns\n", "hosts:\tfiles mdns4_minimal [NOTFOUND=return] dns\n",
           "# hosts: foreign\nhosts: resolve [!UNAVAIL=return] files myhostname dns",
@@ -98,7 +98,7 @@ TEST_F(NameServices, ThatAreNotKnownReadTheSystemsFiles) {
         EXPECT_THAT(filesFor(line), testing::IsSupersetOf({"/etc", "/run", "/usr", "/var"})) << line;
 }
 
-TEST(FilesWithLinks, HoldWhatTheLinksInThemLeadTo) {
+TEST(FilesWithLinks, IncludeTheTargetsOfTheirLinks) {
     const TemporaryDirectory directory;
     writeFile(directory / "elsewhere/root.pem", "");
     writeFile(directory / "certificates/other.pem", "");

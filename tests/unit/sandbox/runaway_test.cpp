@@ -76,7 +76,7 @@ TEST(Runaway, EndsWhenTheWriteThatItIsInHasEnded) {
     EXPECT_EQ(end.said, "written\ntime\n");
 }
 
-TEST(Runaway, SaysNothingIfItMayNot) {
+TEST(Runaway, PrintsNothingIfItMayNot) {
     const ChildEnd end = endOf([](int) {
         sandbox::limitRunaways(1, {-1, "time", "stack", &kStatus});
         raise(SIGXCPU);

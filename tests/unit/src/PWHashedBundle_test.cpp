@@ -265,7 +265,7 @@ class LinkedBundle : public Bundle {
     std::optional<PWHashedBundle> found;  // made after the bundle, which it keeps open
 };
 
-TEST_F(LinkedBundle, HasNoTicketBehindALinkThatLeadsOut) {
+TEST_F(LinkedBundle, HasNoTicketThroughALinkThatLeadsOut) {
     for (const std::string& target :
          {std::string("../Other.app/Contents"), platform.directory / "Other.app/Contents"}) {
         linkContents(target);

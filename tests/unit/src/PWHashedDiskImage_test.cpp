@@ -42,7 +42,7 @@ class DiskImage : public test::DiskImageTest {
     }
 };
 
-TEST_F(DiskImage, IsWhatTheFactoryMakesOfADmgFile) {
+TEST_F(DiskImage, IsMadeByTheFactoryForADmgFile) {
     put(DiskImageBuilder());
     const auto file = PWHashedFile::initWithFileURL(url, platform.services());
     EXPECT_NE(dynamic_cast<PWHashedDiskImage*>(file.get()), nullptr);
@@ -319,7 +319,7 @@ TEST_F(DiskImage, WithAnIndexEntryThatLeadsNowhereIsRefused) {
               "Length of all blobs (20) did not match length of code signing data (32).");
 }
 
-TEST_F(DiskImage, WhoseIndexReachesBehindTheSuperblobIsRefused) {
+TEST_F(DiskImage, WhoseIndexExceedsTheSuperblobIsRefused) {
     Data cut = SuperBlobBuilder().count(1).length(16).build();
     cut.resize(16);
     EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(cut), 66).back(),
@@ -370,7 +370,7 @@ class LargeDiskImage : public SparseDiskImage {
 };
 
 // A ticket of zeros fills up the length.
-TEST_F(LargeDiskImage, WithASuperblobOfFourGibibytesTakesMemoryForWhatIsThere) {
+TEST_F(LargeDiskImage, WithASuperblobOfFourGibibytesTakesMemoryForItsExistingBytes) {
     constexpr std::uint32_t kLength = 0xFFFFFFFF;
     const auto others = static_cast<std::uint32_t>(DiskImageBuilder::signature().build().size());
     const Data header = ByteWriter().be32(0xFADE0B01).be32(kLength - others - 8).data();
@@ -410,20 +410,20 @@ TEST_F(DiskImage, IsNeverReadInFrontOfItsSignature) {
                                              "handle.seek", "handle.read", "handle.seek", "handle.read"}));
 }
 
-TEST_F(DiskImage, AnswersItsTicketWithoutTheBlobsHeader) {
+TEST_F(DiskImage, ReturnsItsTicketWithoutTheBlobsHeader) {
     put(DiskImageBuilder().superblob(
         DiskImageBuilder::signature().blob(0x10002, test::ticketBlob("TICKET"))));
     EXPECT_EQ(open().ticketData(), foundation::toData("TICKET"));
 }
 
-TEST_F(DiskImage, WithoutATicketAnswersNone) {
+TEST_F(DiskImage, WithoutATicketReturnsNone) {
     put(DiskImageBuilder().superblob(DiskImageBuilder::signature()));
     EXPECT_EQ(open().ticketData(), std::nullopt);
     put(DiskImageBuilder());
     EXPECT_EQ(open().ticketData(), std::nullopt);
 }
 
-TEST_F(DiskImage, WithTwoTicketsAnswersTheLaterOne) {
+TEST_F(DiskImage, WithTwoTicketsReturnsTheLaterOne) {
     put(DiskImageBuilder().superblob(SuperBlobBuilder()
                                          .blob(0x10002, test::ticketBlob("FIRST"))
                                          .blob(0x10002, test::ticketBlob("SECOND"))));
@@ -470,7 +470,7 @@ TEST_F(DiskImage, WhoseSignatureNamesNoAlgorithmHasNumber0) {
     EXPECT_EQ(image.digestAlgorithm(), 0U);
 }
 
-TEST_F(DiskImage, UnsignedAnswersTheHashMadeWhileReading) {
+TEST_F(DiskImage, UnsignedReturnsTheHashMadeWhileReading) {
     put(DiskImageBuilder());
     auto image = open();
     platform.codeSigning.addStatus = -36;
@@ -478,7 +478,7 @@ TEST_F(DiskImage, UnsignedAnswersTheHashMadeWhileReading) {
     EXPECT_EQ(image.digestAlgorithm(), 2U);
 }
 
-TEST_F(DiskImage, WithNothingButATicketMakesItsHashWhenAsked) {
+TEST_F(DiskImage, WithOnlyATicketMakesItsHashOnRequest) {
     put(DiskImageBuilder().superblob(SuperBlobBuilder().blob(0x10002, test::ticketBlob("TICKET"))));
     auto image = open();
     EXPECT_EQ(image.digestAlgorithm(), 0U);
@@ -498,7 +498,7 @@ TEST_F(DiskImage, WithAnInvalidSignatureHasTheHashThatIsMadeUp) {
     EXPECT_EQ(image.digestAlgorithm(), 2U);
 }
 
-TEST_F(DiskImage, WhoseHashCannotBeMadeWhenAskedHasNone) {
+TEST_F(DiskImage, WhoseHashCannotBeMadeOnRequestHasNone) {
     put(DiskImageBuilder().superblob(SuperBlobBuilder().blob(0x10002, test::ticketBlob("TICKET"))));
     auto image = open();
     platform.codeSigning.addStatus = -36;

@@ -218,7 +218,7 @@ TEST_F(DiskImageWriting, PutsATicketThatStoodFirstLast) {
                               SuperBlobBuilder().blob(2, requirements).blob(0x10002, ticketBlob("NEW")))));
 }
 
-TEST_F(DiskImageWriting, SaysWhatItDoes) {
+TEST_F(DiskImageWriting, PrintsItsSteps) {
     ASSERT_TRUE(
         write(DiskImageBuilder().superblob(stapled("OLDER").blob(2, test::emptyRequirements())), "NEW"));
     ASSERT_EQ(debugCopies().size(), 1U);
@@ -238,7 +238,7 @@ TEST_F(DiskImageWriting, TouchesTheImageWithOneSeekAndOneWriteAndFlushesIt) {
                      "handle.synchronize", "handle.close"}));
 }
 
-TEST_F(DiskImageWriting, FindsRoomForWhatWillBeLongerBeforeItOverwritesAnything) {
+TEST_F(DiskImageWriting, ReservesTheAdditionalSpaceBeforeItOverwritesAnything) {
     ASSERT_TRUE(write(DiskImageBuilder(), "TICKET"));
     const auto names = platform.files.names();
     const auto opened = std::find(names.begin(), names.end(), "openForUpdating");
@@ -368,7 +368,7 @@ TEST_F(DiskImageWriting, IgnoresTheSourceWhenDeleting) {
     EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(DiskImageBuilder::signature())));
 }
 
-TEST_F(DiskImageWriting, LeavesAPrivateCopyOfWhatItWritesEachTime) {
+TEST_F(DiskImageWriting, LeavesAPrivateCopyOfItsBytesEachTime) {
     ASSERT_TRUE(write(DiskImageBuilder(), "TICKET"));
     ASSERT_EQ(debugCopies().size(), 1U);
     const std::string copy = debugCopies()[0];
@@ -516,7 +516,7 @@ TEST_P(DiskImageReplacement, DeletingTheOnlyBlobThroughTheDriverKeepsIt) {
     EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(stapled("OLD"))));
 }
 
-TEST_P(DiskImageReplacement, DeletingWhatIsNotThereThroughTheDriverFails) {
+TEST_P(DiskImageReplacement, DeletingAMissingTicketThroughTheDriverFails) {
     put(DiskImageBuilder());
     auto image = open();
     EXPECT_FALSE(image._deleteExistingTicket(nullptr));

@@ -170,7 +170,7 @@ TEST_F(Caches, AskTheHookOnceEvenWhenItFindsNothing) {
     EXPECT_EQ(file.ticketCalls, 1);
 }
 
-TEST_F(Caches, AnswerNothingForAnEmptyTicket) {
+TEST_F(Caches, ReturnNothingForAnEmptyTicket) {
     file.ticket = Data{};
     EXPECT_EQ(file.ticketData(), std::nullopt);
     EXPECT_EQ(file.ticketData(), std::nullopt);
@@ -259,7 +259,7 @@ TEST_F(SafeReplacement, OnAVolumeWithoutCloningWritesInPlaceAndMakesNoDirectory)
     EXPECT_EQ(test::readFile(path), "NEW");
 }
 
-TEST_F(SafeReplacement, WithoutAnAnswerAboutCloningWritesInPlace) {
+TEST_F(SafeReplacement, WithoutAResultAboutCloningWritesInPlace) {
     platform.files.fail("volumeSupportsCloning", EIO);
     EXPECT_TRUE(staple());
     EXPECT_TRUE(wroteInPlace());
@@ -314,7 +314,7 @@ TEST_F(SafeReplacement, AFailedWriteLeavesTheFileAndTheCopyAndTheCallersErrorAlo
     EXPECT_EQ(platform.files.count("replaceItem"), 0U);
 }
 
-TEST_F(SafeReplacement, AFailedSwapAnswersYesKeepsTheCodeAndHandsOutTheError) {
+TEST_F(SafeReplacement, AFailedSwapReturnsTrueKeepsTheCodeAndReturnsTheError) {
     platform.files.fail("replaceItem", EBUSY);
     std::optional<Error> error;
     const MessageCapture output(kVerbosityVerbose);
@@ -406,13 +406,13 @@ TEST_F(ChangedFile, IsOneThatIsGone) {
     EXPECT_FALSE(std::filesystem::exists(path));
 }
 
-TEST_F(ChangedFile, IsOneWhoseStateCannotBeTold) {
+TEST_F(ChangedFile, IsAFileWhoseStateIsUnknown) {
     platform.files.fail("stateOfItem", EIO);
     expectRefused();
     EXPECT_EQ(test::readFile(path), "OLD");
 }
 
-TEST_F(SafeReplacement, OfAFileWhoseStateCouldNotBeToldWhenItWasReadIsRefused) {
+TEST_F(SafeReplacement, OfAFileWhoseStateWasUnknownAtTheReadIsRefused) {
     platform.files.fail("stateOfItem", EIO);
     file.noteState();
     platform.files.fail("stateOfItem", 0);

@@ -103,7 +103,7 @@ TEST_F(FlatPackageHash, OfTwoSignaturesTheOneOfTypeCMSIsTakenAndBothAreLogged) {
                                             "Package Sample.pkg uses a checksum of size 20"));
 }
 
-TEST_F(FlatPackageHash, SignaturesBehindTheOneThatIsTakenAreNotLookedAt) {
+TEST_F(FlatPackageHash, SignaturesAfterTheUsedOneAreNotRead) {
     put(ArchiveBuilder().signature("CMS").signature("RSA"));
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_TRUE(package.cdHash().has_value());
@@ -129,7 +129,7 @@ TEST_F(FlatPackageHash, OfAnUnsignedArchiveIsNone) {
     EXPECT_EQ(package.appropriateExitCode(), 0);
 }
 
-TEST_F(FlatPackageHash, ASignatureWithoutATypeIsPassedOver) {
+TEST_F(FlatPackageHash, ASignatureWithoutATypeIsSkipped) {
     put(ArchiveBuilder().element("<signature><size>1</size></signature>").signature("CMS"));
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_TRUE(package.cdHash().has_value());
@@ -145,7 +145,7 @@ TEST_F(FlatPackageHash, ATypeThatCouldDriveTheTerminalIsPrintedEscaped) {
     EXPECT_NE(output.lines().front().find("Length is 4"), std::string::npos);
 }
 
-TEST_F(FlatPackageHash, OfWhatIsNoArchiveIsNoneInSilence) {
+TEST_F(FlatPackageHash, OfAFileThatIsNoArchiveIsNoneWithoutAMessage) {
     for (const std::string& contents : {std::string(), std::string("no archive"), std::string(4096, '\0')}) {
         test::writeFile(path, contents);
         PWHashedFlatPackage file{url, platform.services()};
@@ -162,7 +162,7 @@ TEST_F(FlatPackageHash, OfAMissingFileIsNoneInSilence) {
 }
 
 // It would sign any twenty bytes of the heap.
-TEST_F(FlatPackageHash, OfASignedArchiveWithoutAChecksumAlgorithmIsNoneAndSaysNothing) {
+TEST_F(FlatPackageHash, OfASignedArchiveWithoutAChecksumAlgorithmIsNoneWithoutAMessage) {
     put(ArchiveBuilder()
             .digest("none")
             .checksumElement(R"(<checksum style="none"><offset>0</offset><size>20</size></checksum>)")

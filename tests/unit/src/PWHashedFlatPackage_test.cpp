@@ -56,7 +56,7 @@ TEST_F(FlatPackage, ThatEndsInTheRightVersionByChanceFailsByItsMagic) {
     EXPECT_THAT(output.lines(), ElementsAre("Expected Magic t8lr for trailer but found data"));
 }
 
-TEST_F(FlatPackage, StapledAnswersItsTicketAndSaysHowItWasFound) {
+TEST_F(FlatPackage, StapledReturnsItsTicketAndReportsTheSearch) {
     const PackageBuilder stapled = PackageBuilder().terminator().ticket("TICKET");
     put(stapled);
     const std::size_t start = stapled.archiveSize() + 16;
@@ -98,7 +98,7 @@ TEST_F(FlatPackage, ATicketRecordWithoutDataIsNoTicketThoughItHasAPlace) {
     EXPECT_EQ(package.ticketLength(), 0U);
 }
 
-TEST_F(FlatPackage, OfZeroBytesHasNoTicketAndSaysNothing) {
+TEST_F(FlatPackage, OfZeroBytesHasNoTicketAndPrintsNothing) {
     put("");
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_EQ(package.ticketData(), std::nullopt);
@@ -106,7 +106,7 @@ TEST_F(FlatPackage, OfZeroBytesHasNoTicketAndSaysNothing) {
     EXPECT_EQ(output.text(), "");
 }
 
-TEST_F(FlatPackage, ShorterThanARecordHasNoTicketAndSaysNothing) {
+TEST_F(FlatPackage, ShorterThanARecordHasNoTicketAndPrintsNothing) {
     for (std::size_t length = 1; length < 16; ++length) {
         put(std::string(length, 't'));
         PWHashedFlatPackage file{url, platform.services()};
@@ -144,7 +144,7 @@ TEST_F(FlatPackage, OfATicketsLengthOnlyTheLowHalfCounts) {
     EXPECT_EQ(package.ticketLength(), 6U);
 }
 
-TEST_F(FlatPackage, UnknownTrailersBehindTheTicketAreCollectedInFileOrder) {
+TEST_F(FlatPackage, UnknownTrailersAfterTheTicketAreCollectedInFileOrder) {
     put(PackageBuilder().terminator().ticket("TICKET").unknown("one", 7).unknown("two", 8));
     const std::string expected = PackageBuilder().archive({}).unknown("one", 7).unknown("two", 8).build();
     const MessageCapture output(kVerbosityVerbose);
@@ -170,7 +170,7 @@ TEST_F(FlatPackage, UnknownTrailersUpToTheTerminatorAreCollectedWithoutATicket) 
     EXPECT_EQ(package.dataToAppend(), toData(PackageBuilder().archive({}).unknown("one").build()));
 }
 
-TEST_F(FlatPackage, UnknownTrailersBehindWhatIsNoRecordAreCollected) {
+TEST_F(FlatPackage, UnknownTrailersAfterBytesThatAreNoRecordAreCollected) {
     put(PackageBuilder().unknown("one"));
     EXPECT_EQ(package.ticketData(), std::nullopt);
     EXPECT_TRUE(package.hasTrailers());
@@ -186,7 +186,7 @@ TEST_F(FlatPackage, ATerminatorsTypeWithDataIsAnUnknownTrailer) {
     EXPECT_TRUE(output.contains("Found unknown trailer type 1. Adding 20 bytes to append."));
 }
 
-TEST_F(FlatPackage, ATrailerThatWouldBeginBeforeTheFileEndsTheWalkAndDropsWhatWasCollected) {
+TEST_F(FlatPackage, ATrailerThatWouldBeginBeforeTheFileEndsTheWalkAndDropsTheCollection) {
     TrailerFields fields;
     fields.length = 5;  // of 4 that are there
     put(PackageBuilder().archive({}).bytes("four").trailer(fields).unknown("kept?"));
@@ -205,7 +205,7 @@ TEST_F(FlatPackage, ATicketThatWouldBeginBeforeTheFileIsNone) {
     EXPECT_EQ(package.ticketLength(), 0U);
 }
 
-TEST_F(FlatPackage, RunningOutOfBytesDropsWhatWasCollected) {
+TEST_F(FlatPackage, RunningOutOfBytesDropsTheCollection) {
     put(PackageBuilder().archive({}).bytes("fifteen bytes..").unknown("one"));
     EXPECT_EQ(package.ticketData(), std::nullopt);
     EXPECT_FALSE(package.hasTrailers());
@@ -279,7 +279,7 @@ TEST_F(FlatPackage, WhoseTicketCannotBeReadHasNone) {
     }
 }
 
-TEST_F(FlatPackage, WhoseTicketCannotBeReadDropsTheTrailersBehindIt) {
+TEST_F(FlatPackage, WhoseTicketCannotBeReadDropsTheTrailersAfterIt) {
     put(PackageBuilder().terminator().ticket(kLong).unknown(kLong));
     platform.files.failOperation(kDataRead + 4, EIO);
     EXPECT_EQ(package.ticketData(), std::nullopt);
@@ -305,7 +305,7 @@ TEST_F(FlatPackage, WhoseUnknownTrailersCannotBeReadKeepsNone) {
     }
 }
 
-TEST_F(FlatPackage, WhoseUnknownTrailerComesUpShortKeepsWhatArrivedAndGoesOn) {
+TEST_F(FlatPackage, WhoseUnknownTrailerIsShortKeepsTheReadBytesAndContinues) {
     put(PackageBuilder().terminator().ticket("TICKET").unknown(kLong));
     platform.files.cutRead(kDataRead, 10);
     const MessageCapture output(kVerbosityVerbose);
@@ -348,7 +348,7 @@ TEST_F(FlatPackage, HasTheBeginningOfATicketThatIsLongerThanAny) {
     EXPECT_EQ(package.dataToAppend()->size(), 19U);
 }
 
-TEST_F(FlatPackage, WithAnEmptyTrailerOfFourGibibytesTakesMemoryForWhatIsThere) {
+TEST_F(FlatPackage, WithAnEmptyTrailerOfFourGibibytesTakesMemoryForItsExistingBytes) {
     if (foundation::kSanitized) GTEST_SKIP() << "a sanitizer has memory of its own for what is not there";
     TrailerFields fields;
     fields.length = 0xFFFFFFF0;

@@ -108,7 +108,7 @@ TEST_F(FlatPackageWriting, AFreshObjectReadsTheTicketBack) {
     EXPECT_EQ(package.ticketData(), std::nullopt) << "the first answer stays";
 }
 
-TEST_F(FlatPackageWriting, AnUnknownTrailerBehindTheTicketMovesInFrontOfTheNewOne) {
+TEST_F(FlatPackageWriting, AnUnknownTrailerAfterTheTicketMovesBeforeTheNewOne) {
     put(PackageBuilder().terminator().ticket("OLD").unknown("one").unknown("two", 9));
     EXPECT_TRUE(staple());
     EXPECT_EQ(contents(),
@@ -144,7 +144,7 @@ TEST_F(FlatPackageWriting, AChainOfUnknownTrailersAloneIsWrittenFromOffset0AsWel
 }
 
 // A ticket at offset 0, without a terminator, does not look like a chain: a new chain begins after it.
-TEST_F(FlatPackageWriting, ATicketAtTheStartOfTheFileStaysAndAChainIsBegunBehindIt) {
+TEST_F(FlatPackageWriting, ATicketAtTheStartOfTheFileStaysAndAChainBeginsAfterIt) {
     const PackageBuilder ticketAlone = PackageBuilder().archive({}).ticket("OLD");
     put(ticketAlone);
     EXPECT_TRUE(staple());
@@ -152,7 +152,7 @@ TEST_F(FlatPackageWriting, ATicketAtTheStartOfTheFileStaysAndAChainIsBegunBehind
     EXPECT_EQ(package.appropriateExitCode(), 0);
 }
 
-TEST_F(FlatPackageWriting, DeletingATicketAtTheStartOfTheFileEndsTheChainBehindIt) {
+TEST_F(FlatPackageWriting, DeletingATicketAtTheStartOfTheFileEndsTheChainAfterIt) {
     const PackageBuilder ticketAlone = PackageBuilder().archive({}).ticket("OLD");
     put(ticketAlone);
     EXPECT_TRUE(unstaple());
@@ -442,7 +442,7 @@ TEST_F(FlatPackageWriting, DeletingThroughTheBaseWithoutATicketFailsWith73) {
     EXPECT_EQ(contents(), PackageBuilder().build());
 }
 
-TEST_F(FlatPackageWriting, ADeletionThatFailsSaysThatItWasOne) {
+TEST_F(FlatPackageWriting, AFailedDeletionReportsThatItWasOne) {
     put(PackageBuilder().terminator().ticket("OLD"));
     platform.files.fail("handle.truncate", EIO);
     const MessageCapture output(kVerbosityVerbose);
@@ -452,7 +452,7 @@ TEST_F(FlatPackageWriting, ADeletionThatFailsSaysThatItWasOne) {
     EXPECT_EQ(package.appropriateExitCode(), 73);
 }
 
-TEST_F(FlatPackageWriting, WhatADeletionLeavesIsStapledFromOffset0) {
+TEST_F(FlatPackageWriting, TheRestOfADeletionIsStapledFromOffset0) {
     put(PackageBuilder().terminator().ticket("OLD"));
     EXPECT_TRUE(unstaple());
     PWHashedFlatPackage fresh{url, platform.services()};

@@ -140,7 +140,7 @@ TEST_F(Acceptance, TheHashIsPrintedWithItsAlgorithm) {
     EXPECT_EQ(controller->prettyHashString(), "2/0102030405060708090a0b0c0d0e0f1011121314");
 }
 
-TEST_F(Acceptance, AMissingHashPrintsAsNothingBehindTheAlgorithm) {
+TEST_F(Acceptance, AMissingHashPrintsAsNothingAfterTheAlgorithm) {
     platform.codeSigning.validity = codesign::kUnsigned;
     EXPECT_EQ(controller->prettyHashString(), "0/");
 }

@@ -83,7 +83,7 @@ TEST_F(ArchiveLibrary, OpensThePackagesPathForReading) {
     EXPECT_THAT(library.modes, ElementsAre(0));
 }
 
-TEST_F(ArchiveLibrary, IsAskedForTheDataOfTheFirstCMSSignatureAndNothingElseOfIt) {
+TEST_F(ArchiveLibrary, IsCalledOnlyForTheDataOfTheFirstCMSSignature) {
     library.signatures = {{"RSA", 0, Data(1)}, {"CMS", 0, Data(33, std::byte{1})}, {"CMS", 0, Data(3)}};
     EXPECT_EQ(hash(), Data(33, std::byte{1})) << "whole, whatever its length";
     EXPECT_THAT(library.copied, ElementsAre("CMS"));
@@ -127,7 +127,7 @@ TEST_F(ArchiveLibrary, AChecksumSizeCountsByItsLeadingDigits) {
     }
 }
 
-TEST_F(ArchiveLibrary, ClosesWhatItOpenedOnceOnEveryPath) {
+TEST_F(ArchiveLibrary, IsClosedOnceOnEveryPath) {
     hash();
     EXPECT_EQ(library.closed, 1);
     library.signatures[0].status = 1;

@@ -82,7 +82,7 @@ TEST(BlobSet, RefusesTwoEqualIndexEntries) {
     EXPECT_EQ(lines, Lines{"Did not find 2 unique blobs in the code signing data."});
 }
 
-TEST(BlobSet, TellsTwoBlobsOfOneSlotApart) {
+TEST(BlobSet, DistinguishesTwoBlobsOfOneSlot) {
     const auto [viewed, blobs, lines] =
         read(SuperBlobBuilder().blob(2, second()).blob(2, second()).build(), 2);
     ASSERT_TRUE(blobs.has_value());
@@ -105,14 +105,14 @@ TEST(BlobSet, RefusesAGapBetweenBlobs) {
                             "Length of all blobs (28) did not match length of code signing data (64)."}));
 }
 
-TEST(BlobSet, RefusesAGapBehindTheIndex) {
+TEST(BlobSet, RefusesAGapAfterTheIndex) {
     const Data superblob = SuperBlobBuilder().gap(4).blob(0, first()).blob(2, second()).build();
     const auto [viewed, blobs, lines] = read(superblob, 2);
     EXPECT_EQ(blobs, std::nullopt);
     EXPECT_EQ(lines, Lines{"Length of all blobs (60) did not match length of code signing data (64)."});
 }
 
-TEST(BlobSet, RefusesBytesBehindTheLastBlob) {
+TEST(BlobSet, RefusesBytesAfterTheLastBlob) {
     Data superblob = twoBlobs().build();
     superblob.push_back(std::byte{0});
     const auto [viewed, blobs, lines] = read(superblob, 2);
@@ -130,14 +130,14 @@ TEST(BlobSet, IsShorterThanTheCountWhenTheBlobsBeforeAWrongOneFillTheSuperblob) 
     EXPECT_EQ(lines, Lines{"Total Length: 48 Found blobs: 1"});
 }
 
-TEST(BlobSet, RefusesABlobThatBeginsBehindTheSuperblob) {
+TEST(BlobSet, RefusesABlobThatBeginsAfterTheSuperblob) {
     const auto [viewed, blobs, lines] =
         read(SuperBlobBuilder().blob(2, second()).offsetOf(2, 0xFFFFFFF0).build(), 1);
     EXPECT_EQ(blobs, std::nullopt);
     EXPECT_EQ(lines, Lines{"Length of all blobs (20) did not match length of code signing data (32)."});
 }
 
-TEST(BlobSet, RefusesABlobThatEndsBehindTheSuperblob) {
+TEST(BlobSet, RefusesABlobThatEndsAfterTheSuperblob) {
     // Its own length (1000) agrees with the offsets (28 and 1028).
     const Data overlong = ByteWriter().be32(0xFADE0C01).be32(1000).be32(0).data();
     const auto [viewed, blobs, lines] =
@@ -239,7 +239,7 @@ TEST_F(SuperblobWithTicket, DroppedFromItsOwnOnlyBlobIsNoSuperblobAtAll) {
     EXPECT_EQ(lines, Lines{"Adding 0 blobs to superblob. What about Blob?"});
 }
 
-TEST_F(SuperblobWithTicket, HasRoomBehindItForWhatTheCallerPutsThere) {
+TEST_F(SuperblobWithTicket, HasRoomAfterItForTheCallersBytes) {
     const Data superblob = twoBlobs().build();
     const auto blobs = orderedBlobSetForSuperBlob(superblob, 2);
     ASSERT_TRUE(blobs.has_value());

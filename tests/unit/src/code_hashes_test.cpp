@@ -19,7 +19,7 @@ TEST(ListableHashes, BeginsWithTheOwnHashAndRepeatsNothing) {
               (std::vector<CodeHash>{hashOf(2, 1), hashOf(4, 2), hashOf(1, 1)}));
 }
 
-TEST(ListableHashes, PassesOverWhatATicketCannotList) {
+TEST(ListableHashes, SkipsHashesThatATicketCannotList) {
     EXPECT_EQ(listableHashes(hashOf(2, 1), {{5, Data(20)}, {2, Data(32)}, {7, Data()}, hashOf(0, 1)}),
               (std::vector<CodeHash>{hashOf(2, 1)}));
     EXPECT_EQ(listableHashes(hashOf(0, 1), {hashOf(2, 1), hashOf(4, 1)}),

@@ -168,7 +168,7 @@ TEST_F(LargeTicket, ATicketOfTheRightSizeThatFailsTheCheckEndsWith65) {
 }
 
 // A response without a status has no wrong status.
-TEST_F(LargeTicket, AnAnswerThatIsNoHTTPResponseIsJudgedByItsBody) {
+TEST_F(LargeTicket, AResponseThatIsNotHTTPIsJudgedByItsBody) {
     run.controller.setLargeTicketSize(ticket.size());
     start("https://assets.example/${f}");
     const auto& session = run.platform.https.sessions.back();

@@ -46,7 +46,7 @@ TEST_F(Lookup, PostsTheRecordNameAsCompactJSON) {
     EXPECT_EQ(run.platform.https.sessions[0]->dataTasks[0]->state(), https::TaskState::running);
 }
 
-TEST_F(Lookup, AsksThePlatformsHostForTheDefaultContainerInProduction) {
+TEST_F(Lookup, UsesThePlatformsHostAndTheDefaultContainerInProduction) {
     test::writeFile(run.platform.directory / "platform/platform.json",
                     std::string_view(R"({"lumora":{"host":"localhost:8443"}})"));
     ASSERT_TRUE(grab());
@@ -55,7 +55,7 @@ TEST_F(Lookup, AsksThePlatformsHostForTheDefaultContainerInProduction) {
         "https://localhost:8443/database/1/com.ostrel.tm.ticket-delivery/production/public/records/lookup");
 }
 
-TEST_F(Lookup, AsksTheBuiltInHostWhenThePlatformNamesNone) {
+TEST_F(Lookup, UsesTheBuiltInHostIfThePlatformNamesNone) {
     ASSERT_TRUE(grab());
     EXPECT_EQ(url(),
               "https://api.lumora.example/database/1/com.ostrel.tm.ticket-delivery/production/public/"
@@ -142,7 +142,7 @@ TEST_F(Lookup, WithoutAFileURLEndsWith66BeforeTheNetwork) {
     EXPECT_EQ(file->appropriateExitCode(), 66);
 }
 
-TEST_F(Lookup, WithoutEitherSaysBoth) {
+TEST_F(Lookup, WithoutEitherReportsBoth) {
     struct Nothing : PWHashedFile {
         using PWHashedFile::PWHashedFile;
         std::optional<Data> _cdHash() override { return std::nullopt; }
@@ -210,7 +210,7 @@ TEST_F(Lookup, ATicketRevokedSinceStaplingIsCaughtOnline) {
     EXPECT_EQ(run.answer(ControllerRun::inlineAnswer(unsignedTicket({ControllerRun::fileHash()}, 1))), 77);
 }
 
-TEST_F(Lookup, StapleOfAGoodAnswerWritesTheTicketAndWorks) {
+TEST_F(Lookup, StapleOfAGoodResponseWritesTheTicketAndWorks) {
     ASSERT_TRUE(grab());
     const Data ticket = unsignedTicket({ControllerRun::fileHash()});
     EXPECT_EQ(run.answer(ControllerRun::inlineAnswer(ticket)), 0);
@@ -247,7 +247,7 @@ TEST_F(Lookup, AnEmptyBodyEndsWith68) {
     EXPECT_EQ(output.lines()[0].find("Lumora's response is inconsistent with expections: "), 0U);
 }
 
-TEST_F(Lookup, AnAnswerThatIsNoHTTPResponseEndsWith68) {
+TEST_F(Lookup, AResponseThatIsNotHTTPEndsWith68) {
     ASSERT_TRUE(grab());
     const auto completion = run.platform.https.sessions[0]->completions[0];
     EXPECT_EQ(
@@ -399,7 +399,7 @@ TEST_F(Lookup, AMissingOrUnusableRequestIdentifierIsReplacedByAUniqueString) {
     }
 }
 
-TEST_F(Lookup, AnAnswerWithAnAssetStartsTheDownloadAndEndsNothingYet) {
+TEST_F(Lookup, AResponseWithAnAssetStartsTheDownloadAndEndsNothingYet) {
     ASSERT_TRUE(grab());
     EXPECT_EQ(run.answer(R"({"records":[{"fields":{"signedTicketAsset":{"value":
                             {"downloadURL":"https://assets.example/t/${f}","size":1234}}}}]})"),

@@ -43,13 +43,13 @@ TEST_F(Run, WaitsForItsControllerOnceTheLookupIsUnderWay) {
     EXPECT_EQ(platform.https.sessions.size(), 1U);
 }
 
-TEST_F(Run, ThatStartsNothingEndsWithWhatItRecorded) {
+TEST_F(Run, ThatStartsNothingEndsWithItsRecordedCode) {
     platform.codeSigning.information.reset();
     EXPECT_EQ(staple(), kExitNoInput);
     EXPECT_EQ(waits, 0);
 }
 
-TEST_F(Run, OfWhatCannotBeReadEndsWithTheFilesOwnCode) {
+TEST_F(Run, OfAnUnreadableFileEndsWithTheFilesOwnCode) {
     EXPECT_EQ(operate(kOperationStaple, platform.directory / "none"), kExitNoInput);
     EXPECT_EQ(waits, 0);
 }
@@ -60,7 +60,7 @@ TEST_F(Run, OfAKindThatIsNotSupportedEndsWith66) {
     EXPECT_THAT(output.lines(), Contains(StartsWith("Pinwell is incapable of working with")));
 }
 
-TEST_F(Run, ThatStaplesWhatAnotherKeepsLockedEndsWith73BeforeItReadsAnything) {
+TEST_F(Run, ThatStaplesAFileLockedByAnotherEndsWith73BeforeItReadsAnything) {
     platform.files.fail("lockItem", EBUSY);
     EXPECT_EQ(staple(), kExitCannotCreate);
     EXPECT_THAT(output.lines(),
@@ -123,7 +123,7 @@ TEST_F(Run, ThatValidatesLocksNothing) {
     EXPECT_THAT(platform.files.changes(), IsEmpty());
 }
 
-TEST_F(Run, ThatCanHaveNoSessionEndsAsOneThatReachesNobody) {
+TEST_F(Run, WithoutASessionEndsLikeOneWithoutAConnection) {
     platform.https.failure = foundation::Error(std::string(foundation::kURLErrorDomain), 14, "no thread");
     EXPECT_EQ(platform.exitStatusOf([this] { staple(); }), kExitNoHost);
     EXPECT_THAT(output.lines(), Contains(StartsWith("error is ")));

@@ -215,7 +215,7 @@ TEST_F(SatchelTrust, RefusesFourCertificatesAndNone) {
     EXPECT_EQ(verify(SatchelBuilder::of(chain, payload).certificates({})), status::kBadCertificates);
 }
 
-TEST_F(SatchelTrust, RefusesALeafThatDoesNotStandFirst) {
+TEST_F(SatchelTrust, RefusesALeafThatIsNotFirst) {
     const IssuedChain chain = TicketChain().issue();
     trustAsPlatformRoot(chain);
     EXPECT_NE(verify(SatchelBuilder::of(chain, payload)

@@ -92,7 +92,7 @@ TEST_F(SatchelVerification, RefusesAContainerWithoutACertificateBlock) {
     EXPECT_EQ(verify(satchel().certificateBlock({})), status::kNotAvailable);
 }
 
-TEST_F(SatchelVerification, RefusesAViewWithAPartMissingAndAsksNothing) {
+TEST_F(SatchelVerification, RefusesAViewWithAPartMissingWithoutACall) {
     const Data container = satchel().build();
     satchel_view whole;
     ASSERT_EQ(satchel_decode_header(container.data(), container.size(), &whole), 0);
@@ -127,7 +127,7 @@ TEST_F(SatchelVerification, RefusesASequenceThatEndsOneByteBeforeItsBlock) {
     EXPECT_EQ(verify(satchel().afterSequence(bytes({0x00}))), status::kBadParameter);
 }
 
-TEST_F(SatchelVerification, RefusesASequenceThatEndsBehindItsBlock) {
+TEST_F(SatchelVerification, RefusesASequenceThatEndsAfterItsBlock) {
     const std::size_t contents = kLeaf.size() + kIntermediate.size() + kRoot.size();
     EXPECT_EQ(verify(satchel().outerLength(contents + 1)), status::kNotAvailable);
     EXPECT_EQ(verify(satchel().outerLength(0xFFFFFFFF)), status::kNotAvailable);
@@ -241,7 +241,7 @@ TEST_F(SatchelVerification, PassesOnAStatusOfTheEvaluationWhateverItsVerdict) {
     EXPECT_EQ(verify(satchel()), kForeignStatus);
 }
 
-TEST_F(SatchelVerification, RefusesAChainTrustedOnlyBecauseTheUserSaidSo) {
+TEST_F(SatchelVerification, RefusesAChainTrustedOnlyByTheUser) {
     service.evaluations = {{.verdict = Verdict::proceed}};
     EXPECT_EQ(verify(satchel()), status::kNotTrusted);
 }

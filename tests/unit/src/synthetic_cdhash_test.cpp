@@ -64,7 +64,7 @@ TEST_F(SyntheticCDHash, ComesFromAnAdHocSHA256SignatureOfOpaqueData) {
     EXPECT_EQ(platform.codeSigning.informationSets, 2U);
 }
 
-TEST_F(SyntheticCDHash, WithoutAnyPlaceForAnAnswerIsAParameterErrorThatTouchesNothing) {
+TEST_F(SyntheticCDHash, WithoutAnyPlaceForAResultIsAParameterErrorThatChangesNothing) {
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_EQ(
         syntheticCDHashForURL(platform.directory.url("image.dmg"), platform.services(), nullptr, nullptr),
@@ -74,7 +74,7 @@ TEST_F(SyntheticCDHash, WithoutAnyPlaceForAnAnswerIsAParameterErrorThatTouchesNo
     EXPECT_TRUE(platform.files.operations().empty());
 }
 
-TEST_F(SyntheticCDHash, MayBeAskedForWithoutItsAlgorithmAndTheOtherWayRound) {
+TEST_F(SyntheticCDHash, CanBeRequestedWithoutItsAlgorithmAndViceVersa) {
     const foundation::URL image = platform.directory.url("image.dmg");
     EXPECT_EQ(syntheticCDHashForURL(image, platform.services(), nullptr, &hash), kSuccess);
     EXPECT_EQ(hash, Data(20, std::byte{0xCD}));

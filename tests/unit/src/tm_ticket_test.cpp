@@ -147,7 +147,7 @@ TEST(TicketPayload, RefusesAVersion1SizeThatHasAlgorithmBytes) {
     EXPECT_FALSE(accepts(zeroEntries(2, 20, 2).version(1)));
 }
 
-TEST(TicketPayload, RefusesOneByteBehindTheEntries) {
+TEST(TicketPayload, RefusesOneByteAfterTheEntries) {
     EXPECT_FALSE(accepts(TicketPayloadBuilder().entry(2, hashOf(1)).trailing(Data(1))));
 }
 
@@ -289,7 +289,7 @@ TEST(TicketEntry, OfAVersion1TicketHas20BytesWhateverTheHashLength) {
     EXPECT_EQ(hashAt(ticket, 1), hashOf(100, 20));
 }
 
-TEST(TicketEntry, LeavesZerosBehindTheHash) {
+TEST(TicketEntry, LeavesZerosAfterTheHash) {
     const tm_ticket_ptr ticket = decode(TicketPayloadBuilder().entry(2, Data(20, std::byte{0xEE})).build());
     ASSERT_NE(ticket, nullptr);
     tm_cdhash record;
@@ -300,7 +300,7 @@ TEST(TicketEntry, LeavesZerosBehindTheHash) {
     }
 }
 
-TEST(TicketEntry, IsRefusedAtOrBehindTheCount) {
+TEST(TicketEntry, IsRefusedAtOrAfterTheCount) {
     const tm_ticket_ptr ticket =
         decode(TicketPayloadBuilder().entry(2, hashOf(1)).entry(2, hashOf(2)).build());
     ASSERT_NE(ticket, nullptr);

@@ -43,7 +43,7 @@ TEST(UDIFHeader, TakesNothingButAWholeTrailer) {
     EXPECT_FALSE(header.hasMagic());
 }
 
-TEST(UDIFHeader, KeepsEveryByteButThoseOfTheSignatureFields) {
+TEST(UDIFHeader, KeepsEveryByteExceptTheSignatureFields) {
     auto header = headerOf(DiskImageBuilder());
     header.setCodeSign(0x1122334455667788, 0x99);
     const Data expected =

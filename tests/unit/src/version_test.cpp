@@ -5,7 +5,7 @@
 namespace pinwell {
 namespace {
 
-TEST(Version, IsAWhatStringThatEndsInTheNumberAndANewline) {
+TEST(Version, IsAnIdentificationStringThatEndsInTheNumberAndANewline) {
     EXPECT_STREQ(pinwellVersionString, "@(#)PROGRAM:pinwell  PROJECT:pinwell-34\n");
 }
 

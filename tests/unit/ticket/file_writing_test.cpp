@@ -41,7 +41,7 @@ TEST_F(TicketFiles, ThatAreNewFollowNoLink) {
     EXPECT_FALSE(std::filesystem::exists(directory / "nowhere"));
 }
 
-TEST_F(TicketFiles, ReplaceWhatIsThereAndNotWhatALinkLeadsTo) {
+TEST_F(TicketFiles, ReplaceAnExistingFileAndNotALinksTarget) {
     writeFile(directory / "precious", "precious");
     std::filesystem::create_symlink("precious", file);
     ASSERT_TRUE(replaceFile(asBytes("one"), file));

@@ -34,7 +34,7 @@ TEST_F(TicketIndex, IsSortedByRecordName) {
         "\n");
 }
 
-TEST_F(TicketIndex, KeepsWhatWasThereAndReplacesWhatIsSetAgain) {
+TEST_F(TicketIndex, KeepsEarlierEntriesAndReplacesEntriesSetAgain) {
     Index first;
     first.set("2/2/a", kEntry);
     first.set("2/2/b", kEntry);

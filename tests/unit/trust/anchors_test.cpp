@@ -235,7 +235,7 @@ TEST(DenyFile, HasNoLimitOnItsCertificates) {
     EXPECT_TRUE(loaded.anchors.denied.reaches(*X509Certificate::parse(chain().leaf.der)));
 }
 
-TEST(DenyFile, MayHoldWhatOpensslCallsTrusted) {
+TEST(DenyFile, MayHoldTrustedCertificatesOfOpenssl) {
     const test::TemporaryDirectory directory;
     Data trusted = chain().leaf.der;
     foundation::append(trusted, Data{std::byte{0x30}, std::byte{0}});

@@ -142,7 +142,7 @@ TEST(ChainBuilder, MakesNoMoreSignatureChecksThanItsLimit) {
     EXPECT_EQ(signatureChecks, 256U) << "the bound is one for all searches of a list";
 }
 
-TEST(ChainBuilder, MakesNoCheckBehindTheChainThatItFinds) {
+TEST(ChainBuilder, MakesNoCheckAfterItFindsAChain) {
     Scene scene{test::TicketChain()};
     test::TicketChain impostor;
     for (int i = 0; i < 40; ++i) {
@@ -214,7 +214,7 @@ struct Bounded {
 
 class ExhaustedSearch : public testing::TestWithParam<Bounded> {};
 
-TEST_P(ExhaustedSearch, SaysThatAndNamesNoOtherCause) {
+TEST_P(ExhaustedSearch, ReportsTheBoundAsTheOnlyCause) {
     const Scene scene = GetParam().make();
     const auto trust = scene.trust(anchorOnly());
     Verdict verdict{};

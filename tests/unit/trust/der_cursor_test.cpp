@@ -60,7 +60,7 @@ TEST(DerBitString, CountsUnusedBitsThatAreZero) {
     EXPECT_THROW(bitString(bytes({3, 0xFC})), Malformed) << "an unused bit is set";
 }
 
-TEST(DerBitString, FillsWholeBytesWhereBytesAreAskedFor) {
+TEST(DerBitString, FillsWholeBytesIfBytesAreRequired) {
     EXPECT_EQ(wholeBytes(bytes({0, 0xFC})).size(), 1U);
     EXPECT_THROW(wholeBytes(bytes({3, 0xF8})), Malformed);
     EXPECT_THROW(wholeBytes({}), Malformed);

@@ -46,13 +46,13 @@ TEST(DerTag, RefusesNumbersNotInTheirShortestForm) {
     EXPECT_FALSE(readTag(bytes({0x1F, 0x1E})));        // fits the first byte
 }
 
-TEST(DerTag, RefusesWhatIsCutShort) {
+TEST(DerTag, RefusesACutTag) {
     EXPECT_FALSE(readTag({}));
     EXPECT_FALSE(readTag(bytes({0x1F})));
     EXPECT_FALSE(readTag(bytes({0x1F, 0x81})));
 }
 
-TEST(DerElement, ReadsAShortLengthAndLeavesWhatFollows) {
+TEST(DerElement, ReadsAShortLengthAndLeavesTheRest) {
     const Data data = bytes({0x04, 0x02, 0xAA, 0xBB, 0xCC});
     const auto found = element(data);
     ASSERT_TRUE(found);
@@ -73,7 +73,7 @@ TEST(DerElement, ReadsAnEmptyElement) {
     EXPECT_TRUE(element(bytes({0x05, 0x00}))->contents.empty());
 }
 
-TEST(DerElement, RefusesWhatIsCutShortAtEveryByte) {
+TEST(DerElement, RefusesAnElementCutAtEveryByte) {
     Data data = bytes({0x1F, 0x1F, 0x81, 0x80});
     data.resize(4 + 128);
     ASSERT_TRUE(element(data));

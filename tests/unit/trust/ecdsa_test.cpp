@@ -42,7 +42,7 @@ TEST(TicketSignature, MayFillItsFieldWhole) {
     EXPECT_TRUE(verifiesSample(signature));
 }
 
-TEST(TicketSignature, RefusesANonZeroByteBehindIt) {
+TEST(TicketSignature, RefusesANonZeroByteAfterIt) {
     Data field = padded(sequence(positive(kTestR), positive(kTestS)));
     ASSERT_TRUE(verifyEcdsa(sampleKey(), asBytes("test"), field));
     field.back() = std::byte{1};
@@ -124,7 +124,7 @@ void PrintTo(const Encoding& encoding, std::ostream* out) {
 
 class SignatureEncoding : public testing::TestWithParam<Encoding> {};
 
-TEST_P(SignatureEncoding, IsJudgedAsTheTableSays) {
+TEST_P(SignatureEncoding, IsJudgedAccordingToTheTable) {
     EXPECT_EQ(verifyEcdsa(sampleKey(), asBytes("test"), GetParam().make()), GetParam().verifies);
 }
 

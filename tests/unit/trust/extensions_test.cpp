@@ -193,7 +193,7 @@ TEST(Extensions, AreMalformedWhenTheyOccurTwice) {
     EXPECT_EQ(extensions.entries.size(), 2U);
 }
 
-TEST(Extensions, ThatNobodyKnowsMayHoldAnything) {
+TEST(Extensions, ThatAreUnknownMayHaveAnyContents) {
     EXPECT_THAT(read(99, {}).malformed, IsEmpty());
     EXPECT_TRUE(read(99, {}).carries("2.5.29.99"));
     EXPECT_FALSE(read(99, {}).carries("2.5.29.9"));

@@ -106,7 +106,7 @@ TEST(NameConstraints, HoldForEveryName) {
     EXPECT_EQ(judge(permitted({"a.example"}), {}), NameJudgement::permitted);
 }
 
-TEST(NameConstraints, ExcludeWhatIsPermittedToo) {
+TEST(NameConstraints, ExcludeEvenPermittedNames) {
     NameConstraints both = permitted({"example"});
     both.excluded.dnsNames = {"a.example"};
     EXPECT_TRUE(permits(both, "b.example"));

@@ -9,7 +9,7 @@ using foundation::toData;
 
 const std::string kOne = "-----BEGIN ONE-----\nAQID\n-----END ONE-----\n";
 
-TEST(PemText, IsBlocksAndWhatIsBetweenThem) {
+TEST(PemText, IsBlocksAndTheTextBetweenThem) {
     const std::string text = "a word\n" + kOne + "\n--- not a marker ---\n" + kOne;
     const auto blocks = readPemBlocks(text);
     ASSERT_EQ(blocks.size(), 2U);

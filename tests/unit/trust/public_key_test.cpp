@@ -344,7 +344,7 @@ Data limitedPssKey(const Data& key, unsigned salt) {
     return test::underAlgorithm(key, algorithm(joined({pss, parameters})));
 }
 
-TEST(CertificateSignature, KeepsToWhatAPssKeyStates) {
+TEST(CertificateSignature, KeepsToTheParametersOfAPssKey) {
     const auto verifies = [](unsigned salt, SignatureDigest digest) {
         return verifiesItself(selfSigned(kRsa, [&](CertificateFields& f) {
             f.pss = {digest, digest};
@@ -446,7 +446,7 @@ INSTANTIATE_TEST_SUITE_P(
                      }}),
     [](const auto& tested) { return tested.param.name; });
 
-TEST(CertificateSignature, IsNotTakenWithAByteBehindIt) {
+TEST(CertificateSignature, IsRefusedWithAByteAfterIt) {
     for (const SigningKey* key : {&kEc, &kRsa}) {
         const auto unchanged = selfSigned(*key);
         Data longer = foundation::toData(unchanged->parts().signature);

@@ -162,7 +162,7 @@ TEST(PolicyOption, WithoutAnyAnchorOptionMeansThePlatformsOwn) {
     EXPECT_EQ(scene.verdict({"1.2.3", std::nullopt, {}}), Verdict::recoverableFailure);
 }
 
-TEST(PolicyOption, OfSeveralMarkersAsksForAll) {
+TEST(PolicyOption, OfSeveralMarkersRequiresAll) {
     Policy policy = ticketPolicy();
     policy.options.insert_or_assign(std::string(option::kLeafMarkerOid),
                                     Array{test::kTicketLeafMarker, "1.2.3"});

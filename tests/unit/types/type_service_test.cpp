@@ -182,7 +182,7 @@ TEST_F(Types, ThatAreMissingConformToNothing) {
     EXPECT_FALSE(conforms("", ""));
 }
 
-TEST_F(Types, ThatWereMadeUpBySomebodyElseConformToNothing) {
+TEST_F(Types, OfAnotherServiceConformToNothing) {
     EXPECT_FALSE(conforms("public.symlink", "public.data"));
     EXPECT_FALSE(conforms("public.item", "public.data"));
     EXPECT_FALSE(conforms("public.anything", "public.data"));

@@ -11,7 +11,7 @@ TEST_F(ArchiveChecksum, ThatIsWrongIsRefused) {
     EXPECT_FALSE(opens(ArchiveBuilder().signature("CMS").checksum(Data(20))));
 }
 
-TEST_F(ArchiveChecksum, MayStandAnywhereInTheHeap) {
+TEST_F(ArchiveChecksum, MayBeAnywhereInTheHeap) {
     const ArchiveBuilder builder =
         ArchiveBuilder().beforeChecksum(Data(300, std::byte{0xEE})).signature("CMS");
     const auto archive = open(builder);
@@ -20,7 +20,7 @@ TEST_F(ArchiveChecksum, MayStandAnywhereInTheHeap) {
     EXPECT_EQ(signedData(archive), builder.rightChecksum());
 }
 
-TEST_F(ArchiveChecksum, IsLookedForWhereTheTableSaysAndNowhereElse) {
+TEST_F(ArchiveChecksum, IsReadOnlyAtThePlaceInTheTable) {
     EXPECT_FALSE(opens(ArchiveBuilder().checksumOffset("1")));
     EXPECT_FALSE(opens(ArchiveBuilder().beforeChecksum(Data(20)).checksumOffset("0")));
 }
@@ -30,7 +30,7 @@ TEST_F(ArchiveChecksum, MayBeTheFilesLastBytesAndNoFurtherOn) {
     EXPECT_FALSE(opens(ArchiveBuilder().afterChecksum({}).checksumOffset("1")));
 }
 
-TEST_F(ArchiveChecksum, BehindTheEndOfTheFileIsRefused) {
+TEST_F(ArchiveChecksum, AfterTheEndOfTheFileIsRefused) {
     for (const char* offset :
          {"1000000", "9223372036854775807", "18446744073709551615", "18446744073709551596"})
         EXPECT_FALSE(opens(ArchiveBuilder().checksumOffset(offset))) << offset;
@@ -74,12 +74,12 @@ TEST_F(ArchiveChecksum, AStyleOfAnotherNameSpaceIsNone) {
     EXPECT_FALSE(opens(ArchiveBuilder().checksumElement("<checksum style='sha1' style='sha1'>" + inside)));
 }
 
-TEST_F(ArchiveChecksum, AHeaderThatSaysNoneDoesNotSwitchItOff) {
+TEST_F(ArchiveChecksum, AHeaderWithoutAnAlgorithmDoesNotDisableIt) {
     EXPECT_FALSE(opens(ArchiveBuilder().algorithm(0)));
     EXPECT_FALSE(opens(ArchiveBuilder().algorithm(0).signature("CMS")));
 }
 
-TEST_F(ArchiveChecksum, OfAnUnsignedArchiveStandsAtTheStartOfTheHeapWhenNothingIsSaid) {
+TEST_F(ArchiveChecksum, OfAnUnsignedArchiveIsAtTheStartOfTheHeapByDefault) {
     EXPECT_TRUE(opens(ArchiveBuilder().checksumElement("<checksum style='sha1'/>")));
     EXPECT_TRUE(opens(ArchiveBuilder().checksumElement("<checksum style='sha1'><size>20</size></checksum>")));
     EXPECT_TRUE(
@@ -150,7 +150,7 @@ TEST_F(ArchiveChecksum, InTwoElementsIsRefusedHoweverTheSecondOneIsHidden) {
         EXPECT_TRUE(opens(ArchiveBuilder().checksumElement(whole + none))) << none;
 }
 
-TEST_F(ArchiveChecksum, IsWhatTheSignaturesSignWhateverBecomesOfTheFileAfterwards) {
+TEST_F(ArchiveChecksum, IsTheSignedDataEvenIfTheFileChangesAfterwards) {
     const ArchiveBuilder builder = ArchiveBuilder().signature("CMS");
     const auto archive = open(builder);
     ASSERT_NE(archive, nullptr);

@@ -19,14 +19,14 @@ TEST_F(ArchiveHeader, OfFewerThan28BytesIsRefused) {
     EXPECT_FALSE(opens(ArchiveBuilder().headerSize(0)));
 }
 
-TEST_F(ArchiveHeader, WhatALongerOneAddsIsSkipped) {
+TEST_F(ArchiveHeader, AdditionalBytesOfALongerOneAreSkipped) {
     const ArchiveBuilder longer = ArchiveBuilder().headerTail(Data(5, std::byte{0xEE})).signature("CMS");
     const auto archive = open(longer);
     ASSERT_NE(archive, nullptr);
     EXPECT_EQ(signedData(archive), longer.rightChecksum());
 }
 
-TEST_F(ArchiveHeader, ThatEndsBehindTheFileIsRefused) {
+TEST_F(ArchiveHeader, ThatEndsAfterTheFileIsRefused) {
     EXPECT_FALSE(opens(ArchiveBuilder().headerSize(0xFFFF)));
 }
 
@@ -40,7 +40,7 @@ TEST_F(ArchiveHeader, TheUncompressedLengthIsNotLookedAt) {
     EXPECT_TRUE(opens(ArchiveBuilder().uncompressedLength(~0ULL)));
 }
 
-TEST_F(ArchiveHeader, ACompressedLengthBehindTheEndOfTheFileIsRefused) {
+TEST_F(ArchiveHeader, ACompressedLengthAfterTheEndOfTheFileIsRefused) {
     const std::size_t rest = ArchiveBuilder().build().size() - 28;
     EXPECT_FALSE(opens(ArchiveBuilder().compressedLength(rest + 1)));
     EXPECT_FALSE(opens(ArchiveBuilder().compressedLength(~0ULL)));
@@ -65,7 +65,7 @@ TEST_F(ArchiveHeader, AlgorithmNumbersWithoutAMeaningAreRefused) {
     EXPECT_FALSE(opens(ArchiveBuilder().algorithm(0xFFFFFFFF)));
 }
 
-TEST_F(ArchiveHeader, Algorithm3IsNamedBehindByte28) {
+TEST_F(ArchiveHeader, Algorithm3IsNamedAfterByte28) {
     for (const char* name : {"sha1", "md5", "sha224", "sha256", "sha384", "sha512"})
         EXPECT_TRUE(opens(ArchiveBuilder().namedDigest(name))) << name;
 }

@@ -99,7 +99,7 @@ TEST_F(ArchiveOpening, WithAnyByteOfTheTableOrItsChecksumChangedIsRefused) {
     }
 }
 
-TEST_F(ArchiveOpening, LooksAtNothingBehindTheChecksum) {
+TEST_F(ArchiveOpening, ReadsNothingAfterTheChecksum) {
     EXPECT_TRUE(opens(ArchiveBuilder().signature("CMS").afterChecksum({})));
     EXPECT_TRUE(opens(ArchiveBuilder().signature("CMS").afterChecksum(Data(100'000, std::byte{0xEE}))));
 }
@@ -121,7 +121,7 @@ TEST_F(ArchiveOpening, OfAStreamWithoutItsEndIsRefusedThoughTheDocumentIsWhole) 
     EXPECT_FALSE(opens(ArchiveBuilder().compressedToc(cut)));
 }
 
-TEST_F(ArchiveOpening, PassesOverWhatFollowsTheStreamInsideItsLength) {
+TEST_F(ArchiveOpening, SkipsBytesAfterTheStreamInsideItsLength) {
     Data longer = deflated(tocWith(""));
     longer.resize(longer.size() + 1000);
     EXPECT_TRUE(opens(ArchiveBuilder().compressedToc(longer)));

@@ -75,7 +75,7 @@ TEST_F(ArchiveProperties, StayWhereTheyAreUntilTheArchiveIsClosed) {
     EXPECT_STREQ(first, "20");
 }
 
-TEST_F(ArchiveProperties, WithoutAPlaceForTheAnswerAreMinus1) {
+TEST_F(ArchiveProperties, WithoutAPlaceForTheResultAreMinus1) {
     const auto archive = open(ArchiveBuilder());
     EXPECT_EQ(xar_prop_get(reinterpret_cast<xar_file_t>(archive.get()), "checksum/size", nullptr), -1);
     const char* value = "left over";

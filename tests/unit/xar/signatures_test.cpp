@@ -22,7 +22,7 @@ TEST_F(ArchiveSignatures, ComeInDocumentOrder) {
                 ElementsAre("RSA", "CMS", "RSA"));
 }
 
-TEST_F(ArchiveSignatures, MayStandBeforeTheChecksumAndBehindTheFiles) {
+TEST_F(ArchiveSignatures, MayBeBeforeTheChecksumAndAfterTheFiles) {
     EXPECT_THAT(types(open(ArchiveBuilder().toc(
                     R"(<xar><toc><signature style="A"/>)"
                     R"(<checksum style="sha1"><offset>0</offset><size>20</size></checksum>)"
