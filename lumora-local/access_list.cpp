@@ -1,6 +1,6 @@
 #include "lumora-local/access_list.h"
 
-// The parser is compiled in: Debian's shared library reports errors by exceptions alone.
+// The parser is compiled in: Debian's shared library reports errors only by exceptions.
 #define TOML_HEADER_ONLY 1
 #define TOML_EXCEPTIONS 0
 #include <toml++/toml.h>

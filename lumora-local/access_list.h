@@ -1,12 +1,12 @@
-// DIR/service/access.toml: which client may do what.
+// DIR/service/access.toml: the roles of the clients.
 //
 //   [clients]
 //   "ci.example"      = ["issue", "read"]
 //   "release manager" = ["issue", "revoke", "read"]
 //
-// The name of a client is the common name of its certificate. A client that is not listed may do nothing.
-// Other tables and keys are refused, as are names of more than 64 bytes, an empty list, other roles, more
-// than 10,000 clients, and a file of more than 1 MiB.
+// The name of a client is the common name of its certificate. A client that is not listed has no role. Other
+// tables and keys are refused, and so are names of more than 64 bytes, an empty list, other roles, more than
+// 10,000 clients, and a file of more than 1 MiB.
 #pragma once
 
 #include <map>
@@ -17,7 +17,7 @@
 
 namespace pinwell::lumora {
 
-/// What the file calls roles.
+/// The roles of the file.
 struct Rights {
     bool issue = false;
     bool revoke = false;
@@ -30,7 +30,7 @@ struct Rights {
 /// Reads the file. Throws Failure (EX_CONFIG): one line that names the file and the line.
 std::map<std::string, Rights, std::less<>> readAccessFile(const std::string& path);
 
-/// May be used from any thread.
+/// For any thread.
 class AccessList {
   public:
     /// Throws Failure as readAccessFile does.
@@ -39,7 +39,7 @@ class AccessList {
     /// None for a client that is not listed.
     Rights of(std::string_view client) const;
 
-    /// Reads the file again. Throws Failure, and then the list stays as it was.
+    /// Reads the file again. If it throws Failure, the list stays the same.
     void reload();
 
   private:

@@ -13,7 +13,7 @@ using foundation::Array;
 using foundation::Dictionary;
 using foundation::Value;
 
-/// JSON is UTF-8. What a client sends need not be, and control characters drive terminals.
+/// JSON is UTF-8. A client may send other bytes, and control characters, which drive terminals.
 std::string printable(std::string_view text) {
     return foundation::escapeForDisplay(text);
 }

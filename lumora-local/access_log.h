@@ -15,18 +15,18 @@ enum class LogForm {
     json,  ///< one object a line, everything on standard output
 };
 
-/// A request that was answered. Texts are as the client sent them.
+/// A request with its response. Texts are as the client sent them.
 struct RequestEntry {
     foundation::Date time;
     std::string_view peer;
-    std::string_view client;  // common name of its certificate; empty if the server asks for none
-    std::string_view method;  // empty if the head could not be read
+    std::string_view client;  // common name of its certificate; empty if the server requests none
+    std::string_view method;  // empty if the head is unreadable
     std::string_view target;
     int status = 0;
-    std::size_t size = 0;                               // of the answer's body
+    std::size_t size = 0;                               // of the response's body
     std::string_view identifier;                        // as in X-Ostrel-Request-UUID
-    const std::vector<std::string>* records = nullptr;  // that were looked up; may be null
-    std::chrono::microseconds duration{};               // from the request's first byte to its answer
+    const std::vector<std::string>* records = nullptr;  // the looked-up names; may be null
+    std::chrono::microseconds duration{};               // from the first byte until the response is ready
 };
 
 /// Without a newline.

@@ -15,17 +15,17 @@ namespace pinwell::lumora {
 struct AdHocSignature {
     std::string identifier;
 
-    /// What the page hashes cover: the file from its start to the signature. Borrowed.
+    /// The bytes under the page hashes: the file from its start to the signature. Borrowed.
     foundation::ByteView code;
 
-    /// What the special slots cover, by slot number from 1. The requirements, slot 2, are added; slots that
-    /// are not named are left zero.
+    /// The contents for the special slots, by slot number from 1. The requirements, slot 2, are added; slots
+    /// that are not named are zero.
     std::map<std::uint32_t, foundation::Data> components{};
 
     /// The code is a program's own image, and not data.
     bool isMainProgram = false;
 
-    /// Its length depends on the identifier, the length of the code and the highest slot alone.
+    /// Its length depends only on the identifier, the length of the code and the highest slot.
     foundation::Data superblob() const;
 
     /// The code hash: 20 bytes.

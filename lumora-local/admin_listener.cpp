@@ -56,7 +56,7 @@ AdminListener::AdminListener(const ServiceDirectory& directory, AdminOptions opt
 
 AdminListener::~AdminListener() {
     if (!thread_.joinable()) return;
-    // Nobody has asked the service to stop, and it cannot go on.
+    // Ends the service: it cannot continue after an error.
     if (std::uncaught_exceptions() > 0) ::kill(::getpid(), SIGTERM);
     thread_.join();
 }

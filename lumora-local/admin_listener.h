@@ -1,7 +1,7 @@
-// The second listener of a service: for clients that have a certificate (admin_service.h).
+// The second listener of a service, for clients with a certificate (admin_service.h).
 //
-// It has a server, threads, a connection to the store and bounds of its own, so that what its clients do is
-// in no lookup's way.
+// It has its own server, threads, connection to the store and bounds. So its clients never delay a
+// lookup.
 #pragma once
 
 #include <memory>
@@ -19,7 +19,7 @@ namespace pinwell::lumora {
 
 class AdminListener {
   public:
-    /// Opens all that it needs: the signing key (which may start a process, so the caller has one thread),
+    /// Opens everything it needs: the signing key (which may start a process, so the caller has one thread),
     /// the store, access.toml, the authorities, the socket. Throws Failure.
     AdminListener(const ServiceDirectory& directory, AdminOptions options, const ServeOutput& output);
 
@@ -30,13 +30,13 @@ class AdminListener {
 
     const Endpoint& endpoint() const noexcept { return listener_.endpoint(); }
 
-    /// Adds what it reads while it runs.
+    /// Adds the files that it reads during the run.
     void addRights(sandbox::Confinement& rights, const ServiceDirectory& directory) const;
 
     /// Serves, with threads of its own, at most `connections` at once. `counts` must outlive them.
     void start(int stopDescriptor, std::size_t connections, ServiceCounts& counts);
 
-    /// Reads access.toml again. If it cannot be used, the list stays as it was, and the error log says so.
+    /// Reads access.toml again. An unusable file leaves the list unchanged and is logged as an error.
     void reloadAccess();
 
     /// Reads certificates and a key in a file again, as reloadAccess() does.

@@ -10,7 +10,7 @@
 
 namespace pinwell::lumora {
 
-/// How many records or events are on a page.
+/// The number of records or events on a page.
 inline constexpr std::size_t kDefaultPage = 50;
 inline constexpr std::size_t kMaximumPage = 100;
 
@@ -23,11 +23,11 @@ AdminRoutes changingRoutes(RecordStore& store, SignerInUse signer);
 /// GET /v1/records, GET /v1/events. `store` must outlive the routes.
 AdminRoutes readingRoutes(RecordStore& store);
 
-/// What the query of GET /v1/records and of GET /v1/events asks for. Both throw Refused (400).
+/// The search of GET /v1/records and of GET /v1/events, from the query. Both throw Refused (400).
 RecordSearch recordSearchOf(const Query& query);
 EventSearch eventSearchOf(const Query& query);
 
-/// Where a page begins, as text that fits into a query.
+/// The beginning of a page, as text for a query.
 std::string toString(const RecordCursor& cursor);
 std::string toString(const EventCursor& cursor);
 

@@ -22,7 +22,7 @@ bool fits(const AdminRoute& route, std::string_view path, std::string_view metho
     return fits(route, path) && (route.method == method || (route.method == "GET" && method == "HEAD"));
 }
 
-/// An answer is for its client alone, and is what it says it is.
+/// A response is only for its client, and is of its stated type.
 Answer withCommonHeaders(Answer answer) {
     answer.headers.emplace_back("Cache-Control", "no-store");
     answer.headers.emplace_back("X-Content-Type-Options", "nosniff");
@@ -34,7 +34,7 @@ std::string_view nameOf(bool Rights::*right) {
     return right == &Rights::revoke ? "revoke" : "read";
 }
 
-/// Whether a refusal with this status is about what the client asked for, and not about the moment.
+/// Whether a refusal with this status is about the request itself, not about the moment.
 bool isClientsFault(int status) {
     return status >= 400 && status < 500 && status != 408 && status != 429;
 }

@@ -1,7 +1,7 @@
-// Requests of clients that have a certificate: who may do what, how often, and what is at which path.
+// Requests of clients with a certificate: rights, rates and paths.
 //
-// The paths are in a table. Each row names the method, the path, the right that a client needs, the names
-// that a query may have, and a handler. docs/service/openapi.json describes the requests of /v1.
+// The paths are in a table. Each row has the method, the path, the client's required right, the allowed names
+// in a query, and a handler. docs/service/openapi.json describes the requests of /v1.
 #pragma once
 
 #include <functional>
@@ -18,10 +18,10 @@
 
 namespace pinwell::lumora {
 
-/// What a handler gets. All of it lives until the handler returns.
+/// A handler's input. All of it lives until the handler returns.
 struct AdminRequest {
-    const RequestHead& head;  // `head.client` is who asks
-    std::string_view path;    // the target without its query, as it was sent
+    const RequestHead& head;  // `head.client` is the client's name
+    std::string_view path;    // the target without its query, unchanged
     Query query;
     Rights rights;
     std::optional<std::string> idempotencyKey;  // of a POST
@@ -29,12 +29,12 @@ struct AdminRequest {
 };
 
 struct AdminRoute {
-    std::string method;                   // "GET", with which HEAD is answered too, or "POST"
-    std::string path;                     // whole; if it ends with "*", how the path begins
+    std::string method;                   // "GET", also for HEAD, or "POST"
+    std::string path;                     // the whole path; with "*" at its end, the beginning of the path
     bool Rights::*right;                  // that the client needs
-    std::vector<std::string> parameters;  // names that the query may have
+    std::vector<std::string> parameters;  // the allowed names in the query
 
-    /// From any thread, several at a time. Throws Refused; anything else that it throws becomes 503.
+    /// From any thread, several at a time. Throws Refused; any other exception becomes 503.
     std::function<Answer(const AdminRequest&)> handle;
 };
 using AdminRoutes = std::vector<AdminRoute>;

@@ -1,9 +1,9 @@
-// Records and whole answers, ready in memory as long as nothing changes.
+// Keeps records and whole responses in memory while the store does not change.
 //
-// An entry is held for one state of the store, which has a number (RecordSource::changeCounter). Whoever
-// looks something up asks for the number first. A greater number empties the cache; a record that was read
-// for a smaller number is not taken. So no lookup finds what was true before a change that its store knows
-// of.
+// An entry is valid for one state of the store, which has a number (RecordSource::changeCounter). Each
+// lookup first reads the number. A greater number empties the cache. A record that was read for a
+// smaller number is not added. So no lookup returns a state older than the latest change known to its
+// store.
 #pragma once
 
 #include <cstdint>
@@ -19,13 +19,13 @@
 
 namespace pinwell::lumora {
 
-/// A record as answers have it, or the body of a whole answer.
+/// A record in the form of a response, or the body of a whole response.
 struct KeptAnswer {
     std::string text;
-    std::vector<std::string> names{};  // of the records in a whole answer
+    std::vector<std::string> names{};  // of the records in a whole response
 };
 
-/// May be used from any thread.
+/// For any thread.
 class AnswerCache {
   public:
     struct Limits {
@@ -36,11 +36,11 @@ class AnswerCache {
     AnswerCache() : AnswerCache(Limits{}) {}
     explicit AnswerCache(Limits limits) : limits_(limits) {}
 
-    /// `key` is a record's name or the body of a request. Null if there is nothing for it.
+    /// `key` is a record's name or the body of a request. Returns null if there is no entry.
     std::shared_ptr<const KeptAnswer> find(std::uint64_t state, Environment environment,
                                            std::string_view key);
 
-    /// What was used longest ago makes room. What is larger than a hundredth of all room is not taken.
+    /// Removes the least recently used entries first. An entry may take a hundredth of the capacity at most.
     void insert(std::uint64_t state, Environment environment, std::string_view key,
                 std::shared_ptr<const KeptAnswer> answer);
 
@@ -55,7 +55,7 @@ class AnswerCache {
     };
     using Entries = std::list<Entry>;
 
-    /// With the lock held; whether the cache is about this state now.
+    /// With the lock held. Returns whether the cache is valid for this state now.
     bool moveTo(std::uint64_t state);
     void dropOldest();
 
@@ -63,7 +63,7 @@ class AnswerCache {
     mutable std::mutex mutex_;
     std::uint64_t state_ = 0;
     std::size_t bytes_ = 0;
-    Entries entries_;  // the one that was used last comes first
+    Entries entries_;  // in the order of their last use, newest first
     std::unordered_map<std::string_view, Entries::iterator> places_;  // the keys are the entries' own
 };
 

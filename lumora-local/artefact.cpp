@@ -12,8 +12,8 @@ std::vector<CodeHash> hashesForTicket(const CodeHash& own, const std::vector<Cod
     std::vector<CodeHash> hashes{own};
     std::set<CodeHash> listed{own};
     for (const CodeHash& hash : found) {
-        // Digest types that tickets do not know (a later platform's) leave the artefact's other hashes
-        // usable. A ticket over a hash of unknown digest type lists such hashes alone.
+        // Hashes of unknown digest types (a later platform's) do not prevent the use of the artefact's other
+        // hashes. A ticket over a hash of unknown digest type lists only such hashes.
         if (canListWith(own, hash) && listed.insert(hash).second) hashes.push_back(hash);
     }
     return hashes;

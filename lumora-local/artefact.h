@@ -1,4 +1,4 @@
-// What an artefact is to the service: the hash that names its record, and every hash its ticket vouches for.
+// An artefact for the service: the hash that names its record, and all hashes that its ticket lists.
 #pragma once
 
 #include <string>
@@ -10,25 +10,25 @@ namespace pinwell::lumora {
 
 struct Artefact {
     std::string label;  // its file name
-    CodeHash own;       // the hash that a client looks it up by
+    CodeHash own;       // clients look the artefact up by this hash
 
-    /// `own` first, then those of all slices and of nested code; no duplicates.
+    /// `own` first, then the hashes of all slices and of nested code; no duplicates.
     std::vector<CodeHash> hashes;
 };
 
 /// Whether a ticket for an artefact with this own hash can list `hash` as well.
 bool canListWith(const CodeHash& own, const CodeHash& hash);
 
-/// Joins an artefact's own hash with whatever else was found in it: no duplicates, and nothing that a ticket
-/// with this own hash could not list.
+/// Joins an artefact's own hash with the other hashes found in it: no duplicates, and only hashes that a
+/// ticket with this own hash can list.
 std::vector<CodeHash> hashesForTicket(const CodeHash& own, const std::vector<CodeHash>& found);
 
 class ArtefactHasher {
   public:
     virtual ~ArtefactHasher() = default;
 
-    /// Reads the artefact at `path`. Blocks. Throws Failure: EX_NOINPUT when nothing is there, EX_DATAERR
-    /// when it is not one of the supported kinds or has no hash.
+    /// Reads the artefact at `path`. Blocks. Throws Failure: EX_NOINPUT if there is no file, EX_DATAERR if it
+    /// is of no supported kind or has no hash.
     virtual Artefact examine(const std::string& path) = 0;
 };
 

@@ -18,7 +18,7 @@ Identity toPem(const IssuedCertificate& issued, std::string_view passphrase) {
     return {encodeCertificate(issued.certificate.get()), encodeKey(issued.key.get(), passphrase)};
 }
 
-/// Canonical hosts hold no character that the configuration syntax gives a meaning.
+/// Canonical hosts have no character with a meaning in the configuration syntax.
 std::string subjectAlternativeName(const std::vector<std::string>& hosts) {
     std::string names;
     for (const std::string& host : hosts) {

@@ -1,12 +1,12 @@
-// The service's own certificate authority: who signs its tickets and who speaks for its host names.
+// The service's own certificate authority, for its tickets and its host names.
 //
 //   root                 self-signed, CA; the one anchor of the platform directory
 //   ├─ intermediate      CA, path length 0, extension 1.2.840.177245.100.6.2.17
 //   │  └─ ticket signer  extension 1.2.840.177245.100.6.1.30, digitalSignature
 //   └─ server            extension 1.2.840.177245.100.6.27.2, serverAuth, subject alternative names
 //
-// All keys are EC P-256, all signatures ECDSA with SHA-256; every certificate carries key identifiers
-// (RFC 5280, 4.2.1.1 and 4.2.1.2), basic constraints, key usage and a non-empty subject.
+// All keys are EC P-256, all signatures ECDSA with SHA-256. Every certificate has key identifiers (RFC 5280,
+// 4.2.1.1 and 4.2.1.2), basic constraints, key usage and a non-empty subject.
 #pragma once
 
 #include <string>
@@ -23,7 +23,7 @@ inline constexpr std::string_view kTicketIntermediateMarkerOid = "1.2.840.177245
 inline constexpr std::string_view kTicketSignerMarkerOid = "1.2.840.177245.100.6.1.30";
 inline constexpr std::string_view kServerMarkerOid = "1.2.840.177245.100.6.27.2";
 
-/// A certificate and its private key, both PEM. The key is wiped when the identity goes.
+/// A certificate and its private key, both PEM. The destructor wipes the key.
 struct Identity {
     Identity(std::string itsCertificate, std::string itsPrivateKey)
         : certificate(std::move(itsCertificate)), privateKey(std::move(itsPrivateKey)) {}
@@ -43,14 +43,14 @@ struct Authority {
     Identity server;
 };
 
-/// Fresh keys and certificates, valid from a day before `now` (clocks differ) for ten years: an isolated site
-/// has nobody to renew them. `hosts` are canonical (endpoint.h) and not empty; the first is the server's
-/// common name. The keys are encrypted unless `passphrase` is empty. Throws Failure when the cryptographic
-/// library fails.
+/// Fresh keys and certificates, valid from a day before `now` (clocks differ) for ten years, because nobody
+/// renews them at an isolated site. `hosts` are canonical (endpoint.h) and not empty; the first is the
+/// server's common name. The keys are encrypted unless `passphrase` is empty. Throws Failure if the
+/// cryptographic library fails.
 Authority createAuthority(const std::vector<std::string>& hosts, foundation::Date now,
                           std::string_view passphrase = {});
 
-/// Where an issuer's certificate and key are.
+/// The paths of an issuer's certificate and key.
 struct IssuerFiles {
     std::string certificate;
     std::string key;
@@ -68,14 +68,14 @@ std::string certifySigner(const IssuerFiles& intermediate, foundation::ByteView 
 Identity issueServer(const IssuerFiles& root, const std::vector<std::string>& hosts, foundation::Date now,
                      std::string_view passphrase);
 
-/// An authority for the certificates of clients, for clients alone: apart from the service's own. The key is
-/// encrypted unless `passphrase` is empty.
+/// An authority for certificates of clients only, separate from the service's own. The key is encrypted
+/// unless `passphrase` is empty.
 Identity createClientAuthority(foundation::Date now, std::string_view passphrase);
 
 /// A client's certificate (clientAuth) with this common name, and its key in the clear.
 Identity issueClient(const IssuerFiles& authority, const std::string& commonName, foundation::Date now);
 
-/// A fresh signer's key and, in the place of the certificate, the request for one (RFC 2986, PEM).
+/// A fresh signer's key, with a certificate request (RFC 2986, PEM) instead of the certificate.
 Identity requestSigner(std::string_view passphrase);
 
 }  // namespace pinwell::lumora

@@ -42,7 +42,7 @@ auto withDatabase(const std::string& file, Work&& work) {
     }
 }
 
-/// Relative names of all that a backup holds beside the records.
+/// Relative names of all files of a backup, without the records.
 std::vector<std::string> filesOf(const std::string& root) {
     std::vector<std::string> names;
     for (const char* folder : {"service", "platform"}) {
@@ -104,7 +104,7 @@ void archiveFiles(SQLite::Database& database, const std::string& root) {
     transaction.commit();
 }
 
-/// A file that is removed again unless it gets its name.
+/// A file that is removed again unless it gets its final name.
 class UnfinishedFile {
   public:
     explicit UnfinishedFile(const std::string& finalPath)
@@ -120,7 +120,7 @@ class UnfinishedFile {
     void publish() const {
         const foundation::FileDescriptor file(::open(path_.c_str(), O_RDONLY | O_CLOEXEC));
         if (!file || ::fsync(file.get()) != 0) fail(EX_IOERR, "flush");
-        // Neither replaces a file that was made meanwhile; not every file system has both.
+        // Neither call replaces a file made by another process; some file systems have only one of them.
         if (::renameat2(AT_FDCWD, path_.c_str(), AT_FDCWD, finalPath_.c_str(), RENAME_NOREPLACE) != 0 &&
             (errno != EINVAL || ::link(path_.c_str(), finalPath_.c_str()) != 0)) {
             fail(EX_CANTCREAT, "create");

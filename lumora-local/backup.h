@@ -1,8 +1,8 @@
-// The whole of a service in one file, made while it runs.
+// A whole service in one file, made during its run.
 //
-// The file is a SQLite database: the records and their log as of one moment, and beside them a table `sqlar`
-// (SQLite's own form of an archive) with service.json, keys, certificates and the platform directory. What is
-// elsewhere is not in it: a root's key that was put elsewhere, a token, a passphrase.
+// The file is a SQLite database: the records and their log at one moment, and a table `sqlar` (SQLite's own
+// form of an archive) with service.json, keys, certificates and the platform directory. It does not contain a
+// root's key in another place, a token, or a passphrase.
 #pragma once
 
 #include <string>
@@ -12,12 +12,12 @@
 
 namespace pinwell::lumora {
 
-/// Makes `file`, readable by its owner alone and flushed, or nothing. Throws Failure: EX_CANTCREAT if it
-/// exists, EX_CONFIG if the records are in a database that is backed up by its own means.
+/// Makes `file`, flushed and readable only by its owner; on failure it makes no file. Throws Failure:
+/// EX_CANTCREAT if it exists, EX_CONFIG if the records are in a database, which needs its own backup.
 void backUp(const ServiceDirectory& directory, const std::string& file);
 
-/// Makes a service at `path`, which must not exist or be an empty directory, from a backup; or nothing. The
-/// log of the records is verified first. Throws Failure (EX_DATAERR) if `file` is no backup, or is damaged.
+/// Makes a service at `path`, which must be missing or an empty directory, from a backup; on failure it makes
+/// nothing. It verifies the log first. Throws Failure (EX_DATAERR) if `file` is no backup, or is damaged.
 void restore(const std::string& file, const std::string& path);
 
 }  // namespace pinwell::lumora

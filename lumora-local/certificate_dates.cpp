@@ -12,7 +12,7 @@ std::vector<CertificateDate> certificateDates(const ServiceDirectory& directory)
         try {
             dates.push_back({role, foundation::Date{expiryOf(readCertificateFile(path).get())}});
         } catch (const Failure&) {
-            // A service for lookups has no signer; another file may be out of reach by now.
+            // A service for lookups has no signer; another file may have become unreadable.
         }
     };
     add("server", directory.serverCertificatePath());

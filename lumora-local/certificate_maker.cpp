@@ -19,7 +19,7 @@ constexpr std::int64_t kValidity = 3653 * kDay;
 // RFC 5280, 4.1.2.2: at most 20 octets and positive, so 159 random bits.
 constexpr int kSerialNumberBits = 159;
 
-// The markers count by their presence alone; their value is an ASN.1 NULL.
+// The presence of the markers counts; their value is an ASN.1 NULL.
 constexpr std::array<unsigned char, 2> kMarkerValue{0x05, 0x00};
 
 void releaseExtensions(STACK_OF(X509_EXTENSION) * list) {

@@ -27,7 +27,7 @@ struct RevocationRequest {
     std::string comment;
 };
 
-/// Both throw Refused: 400 for what is no JSON object, 422 for a member that is missing, unknown, of another
+/// Both throw Refused: 400 if the text is not a JSON object, 422 if a member is missing, unknown, of another
 /// type or out of its bounds.
 TicketRequest parseTicketRequest(std::string_view body);
 RevocationRequest parseRevocationRequest(std::string_view body);

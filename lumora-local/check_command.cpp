@@ -104,7 +104,7 @@ class Inspection {
             checkDate(nameOf(certificate.get()), certificate.get());
     }
 
-    /// Keys that may be elsewhere.
+    /// Keys that may be in another place.
     void checkAuthorityKeys() {
         checkKeyIfThere("root.key", directory_.rootCertificatePath());
         const std::vector<std::string>& chain = directory_.signerChainPaths();

@@ -17,11 +17,11 @@ enum class Condition { fine, expiresSoon, wrong };
 
 struct Finding {
     Condition condition = Condition::fine;
-    std::string subject;  // what was looked at
+    std::string subject;  // the checked item
     std::string text;
 };
 
-/// Looks at everything, whatever it finds; writes nothing. `warning` is in seconds.
+/// Completes all checks, even after a fault; writes nothing. `warning` is in seconds.
 std::vector<Finding> checkService(const ServiceDirectory& directory, foundation::Date now,
                                   std::int64_t warning);
 
@@ -31,7 +31,7 @@ int exitStatusOf(const std::vector<Finding>& findings);
 /// One line a finding, tab-separated: ok, soon or wrong; the subject; the text.
 std::string describeFindings(const std::vector<Finding>& findings);
 
-/// "12h", "30d" or "8w" in seconds; `nullopt` for any other text, and beyond a century.
+/// "12h", "30d" or "8w" in seconds; `nullopt` for any other text, and for more than a century.
 std::optional<std::int64_t> parseDuration(std::string_view text);
 
 }  // namespace pinwell::lumora

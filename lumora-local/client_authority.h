@@ -1,9 +1,9 @@
-// Certificates for the clients of the administration listener, from an authority of the service's own.
+// Certificates for the clients of the administration listener, from an authority of the service.
 //
 //   DIR/service/clients/ca.pem   the authority's certificate, for --client-ca
-//   DIR/service/clients/ca.key   its key, encrypted as the service's other keys are
+//   DIR/service/clients/ca.key   its key, encrypted like the service's other keys
 //
-// The authority vouches for clients alone: nothing else of the service trusts it.
+// The authority is for clients only: no other part of the service trusts it.
 #pragma once
 
 #include <string>
@@ -13,11 +13,11 @@
 
 namespace pinwell::lumora {
 
-/// Where the authority's certificate is, or will be.
+/// The path of the authority's certificate, present or future.
 std::string clientAuthorityPath(const ServiceDirectory& directory);
 
-/// Makes `folder`, which must not exist or be empty, with client.pem and client.key (mode 0600, in the
-/// clear) for a client of that name; the first time, the authority too. Throws Failure: EX_USAGE if the name
+/// Makes `folder`, which must be missing or empty, with client.pem and client.key (mode 0600, unencrypted)
+/// for a client of that name. The first call also makes the authority. Throws Failure: EX_USAGE if the name
 /// is not 1 to 64 bytes of UTF-8 without control characters.
 void makeClientCertificate(const ServiceDirectory& directory, const std::string& name,
                            const std::string& folder, foundation::Date now);

@@ -23,7 +23,7 @@ constexpr std::size_t kMaximumCertificates = 8;
 constexpr std::size_t kMaximumCertificateSize = std::size_t{16} * 1024;
 constexpr long kMaximumMessageSize = 64L * 1024;
 constexpr int kMaximumIntermediates = 4;
-constexpr int kSecurityLevel = 2;  // 112 bits, whatever the system's configuration says
+constexpr int kSecurityLevel = 2;  // 112 bits, for every system configuration
 constexpr int kFewestRsaBits = 2048;
 constexpr int kMostRsaBits = 8192;
 
@@ -70,7 +70,7 @@ bool namesItsPurpose(X509* certificate) {
            (X509_get_extended_key_usage(certificate) & XKU_SSL_CLIENT) != 0;
 }
 
-/// `nullopt` unless there is exactly one that can be a client's name.
+/// `nullopt` unless there is exactly one, and it is a valid name of a client.
 std::optional<std::string> commonNameOf(X509* certificate) {
     const X509_NAME* subject = X509_get_subject_name(certificate);
     const int place = X509_NAME_get_index_by_NID(subject, NID_commonName, -1);
@@ -96,7 +96,7 @@ int refuse(X509_STORE_CTX* context, int error) {
     return 0;
 }
 
-/// The library has read the certificates and checked nothing yet.
+/// The library has parsed the certificates and checked nothing yet.
 int judge(X509_STORE_CTX* context, void*) {
     X509* const shown = X509_STORE_CTX_get0_cert(context);
     STACK_OF(X509)* const sent = X509_STORE_CTX_get0_untrusted(context);
@@ -136,7 +136,7 @@ void askForClients(SSL_CTX* context, const std::string& authoritiesFile) {
                     SSL_CTX_add_client_CA(context, authority.get()) == 1,
                 "use the certificates in " + authoritiesFile);
     }
-    // An intermediate authority in the file is trusted without the one above it.
+    // An intermediate authority in the file is trusted without its issuer.
     require(X509_STORE_set_flags(store.get(), X509_V_FLAG_PARTIAL_CHAIN) == 1 &&
                 SSL_CTX_set1_verify_cert_store(context, store.get()) == 1,
             "set up TLS");

@@ -1,10 +1,10 @@
-// Clients that show a certificate: which ones are accepted, and who they are.
+// Clients with a certificate: the conditions for acceptance, and their names.
 //
 // A client's certificate chains to one of the authorities in a PEM file, is valid now, names the purpose
 // clientAuth (RFC 5280, 4.2.1.12), and has one common name: 1 to 64 bytes of UTF-8 without control
-// characters. What a client sends is held to bounds before a signature in it is checked: 8 certificates, each
-// of at most 16 KiB and without indefinite lengths; RSA keys of 2048 to 8192 bits, EC keys on P-256, P-384
-// and P-521, Ed25519 and Ed448. Revocation lists are not asked: a client loses its rights in access.toml.
+// characters. Bounds hold before a signature is checked: 8 certificates, each of at most 16 KiB and without
+// indefinite lengths; RSA keys of 2048 to 8192 bits, EC keys on P-256, P-384 and P-521, Ed25519 and Ed448.
+// Revocation lists are not read: access.toml takes rights away.
 #pragma once
 
 #include <optional>
@@ -21,7 +21,7 @@ namespace pinwell::lumora {
 /// RFC 5280, appendix A: ub-common-name.
 inline constexpr std::size_t kMaximumClientName = 64;
 
-/// Whether a common name can be a client's.
+/// Whether a common name is a valid name of a client.
 bool canNameAClient(std::string_view name);
 
 struct Client {
@@ -29,12 +29,12 @@ struct Client {
     foundation::Date validUntil;
 };
 
-/// Makes the context ask each client for a certificate of one of the authorities in the file. Sessions are
-/// not resumed: each connection is judged anew. Throws Failure: EX_NOINPUT if the file cannot be read,
-/// EX_CONFIG if it holds no certificate of an authority, or one that is none.
+/// Makes the context require from each client a certificate of one of the authorities in the file. Sessions
+/// are not resumed: each connection is judged again. Throws Failure: EX_NOINPUT if the file cannot be read,
+/// EX_CONFIG if it has no certificate, or one that is not an authority's.
 void askForClients(ssl_ctx_st* context, const std::string& authoritiesFile);
 
-/// Who is on the other side of a connection whose handshake is done; `nullopt` if nobody has shown a
+/// The client of a connection after its handshake; `nullopt` if the client has sent no
 /// certificate.
 std::optional<Client> clientOf(ssl_st* connection);
 

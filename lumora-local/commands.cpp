@@ -58,7 +58,7 @@ Record recordOfName(const std::string& name, const std::string& label) {
     return record;
 }
 
-/// A record's name has the shape of a relative path, and a file may have that name: the record goes first.
+/// A record's name looks like a relative path, and a file may have this name: the record takes precedence.
 Record recordOf(const Registry& registry, const std::string& subject) {
     if (parseRecordName(subject)) {
         if (const auto record = registry.store.find(registry.environment, subject)) return *record;

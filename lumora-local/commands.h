@@ -12,30 +12,30 @@
 
 namespace pinwell::lumora {
 
-/// Tickets beyond this are delivered as assets: an inline one grows by a third in the response.
+/// Larger tickets are delivered as assets: an inline ticket grows by a third in the response.
 inline constexpr std::size_t kMaximumInlineTicketSize = 1024 * 1024;
 
-/// What issuing and revoking work on. References must outlive it.
+/// The objects for issuing and revoking. References must outlive it.
 struct Registry {
     RecordStore& store;
     const TicketSigner& signer;
     ArtefactHasher& hasher;
     Environment environment = Environment::production;
-    std::string actor;  // who does it, for the log
+    std::string actor;  // for the log
     std::function<foundation::Date()> now = foundation::Date::now;
 };
 
-/// What to issue tickets for, and how.
+/// The subjects and options of issuing.
 struct IssueRequest {
     std::vector<std::string> paths;        // artefacts
     std::vector<std::string> recordNames;  // of artefacts that are not here; each ticket lists that one hash
     std::string label;                     // of `recordNames`; empty: the record's name
     bool asAsset = false;
-    bool reinstates = false;  // revoked records become valid again
+    bool reinstates = false;  // makes revoked records valid again
     std::string comment;      // for the log
 };
 
-/// What to revoke, and why.
+/// The subjects and options of revoking.
 struct RevokeRequest {
     std::vector<std::string> subjects;  // names of records or paths of artefacts
     Reason reason = Reason::unspecified;
@@ -48,25 +48,25 @@ struct RevokeRequest {
 /// record's.
 std::vector<Record> issue(const Registry& registry, const IssueRequest& request);
 
-/// Puts a revoked ticket in the place of the record that each subject names, all or none. What has no record
-/// is an error (EX_DATAERR). Returns the records in the order of the request. Throws Failure.
+/// Replaces the ticket of each subject's record by a revoked one, for all or for none. A subject without a
+/// record is an error (EX_DATAERR). Returns the records in the order of the request. Throws Failure.
 std::vector<Record> revoke(const Registry& registry, const RevokeRequest& request);
 
-/// An artefact that is not here, as somebody describes it who has it.
+/// An artefact on another machine, in its owner's description.
 struct DescribedArtefact {
     std::string label;  // empty: the record's name
     CodeHash own;
     std::vector<CodeHash> others;  // that the ticket is to list as well; hashesForTicket() joins them
 };
 
-/// What became of one change.
+/// The result of one change.
 struct Change {
     Event event;
     foundation::Data ticket;
 };
 
-/// Issues a ticket for one artefact by its description. The occasion's request makes a repetition known: the
-/// result is that of the first time then. Throws Failure as issue() and RecordStore::put() do.
+/// Issues a ticket for one artefact by its description. If the occasion's request is a repetition, the result
+/// is the one of the first time. Throws Failure like issue() and RecordStore::put().
 Change issueDescribed(RecordStore& store, const TicketSigner& signer, Environment environment,
                       const DescribedArtefact& artefact, const Occasion& occasion);
 

@@ -27,18 +27,18 @@ using Tcp = asio::ip::tcp;
 constexpr const char* kRequestIdentifierHeader = "X-Ostrel-Request-UUID";
 constexpr std::string_view kContinue = "HTTP/1.1 100 Continue\r\n\r\n";
 
-// What a body may bring beside itself when it comes in chunks.
+// The allowance for the framing of a chunked body.
 constexpr std::size_t kFramingAllowance = 256 * 1024;
 
-// How long a closing connection is read on: closing at once would make the kernel reset it and take the
-// answer back that the peer has yet to read.
+// How long a closing connection is still read. An immediate close would make the kernel reset the connection
+// and discard the unread response.
 constexpr milliseconds kFarewellTime{5'000};
 constexpr milliseconds kFarewellTimeWhenStopping{
     500};  // a service that is to end does not wait for idle clients
 constexpr std::size_t kFarewellBytes = 4 * 1024 * 1024;
 
 constexpr std::size_t kReadSize = 16 * 1024;
-constexpr std::size_t kFirstReadSize = 1024;  // an idle connection holds so much for what may come
+constexpr std::size_t kFirstReadSize = 1024;  // for an idle connection's first bytes
 
 std::string addressOf(const Tcp::endpoint& endpoint) {
     boost::system::error_code ignored;
@@ -49,7 +49,7 @@ std::string describe(const Tcp::endpoint& endpoint) {
     return toString(Endpoint{addressOf(endpoint), endpoint.port()});
 }
 
-/// The head of an answer; the caller adds the body.
+/// The head of a response; the caller adds the body.
 template <class Body>
 void setHead(http::response<Body>& message, const Answer& answer, unsigned version, bool close) {
     message.version(version);
@@ -114,7 +114,7 @@ void Connection::handshake() {
     });
 }
 
-/// Only where clients have names: whoever comes without one would go unnoticed otherwise.
+/// Only where clients have names: otherwise a client without one would go unnoticed.
 void Connection::logFailedHandshake(ErrorCode error) const {
     if (!context_.tls.asksForClients() || phase_ == Phase::closing ||
         error.category() != asio::error::get_ssl_category())
@@ -122,8 +122,8 @@ void Connection::logFailedHandshake(ErrorCode error) const {
     context_.errorLog(format("%@: no connection: %s", peer_, error.message()));
 }
 
-/// A client whose certificate has expired since the handshake, or was judged by authorities that a reload has
-/// replaced, has to come again.
+/// A client must reconnect if its certificate has expired since the handshake, or if a reload has replaced
+/// the authorities that it was judged by.
 bool Connection::mayGoOn() const {
     if (!client_) return true;
     return foundation::Date::now() <= client_->validUntil && tls_ == context_.tls.current();
@@ -387,7 +387,7 @@ void Connection::onTimeout() {
     ErrorCode ignored;
     if (phase_ == Phase::reading) {
         timedOut_ = true;
-        socket().cancel(ignored);  // the read ends, and the refusal goes out
+        socket().cancel(ignored);  // the read ends, and the refusal is sent
     } else if (phase_ == Phase::silent && established_) {
         socket().cancel(ignored);  // the read ends, and the connection is closed in good form
     } else {

@@ -1,7 +1,7 @@
-// One client's connection: handshake, requests, answers, each within its time and size.
+// One client's connection: handshake, requests, responses, each within its limits of time and size.
 //
-// All of it runs on the connection's own strand. Nothing blocks while a client is slow: what a connection
-// costs then is memory alone, and little before its first byte.
+// All of it runs on the connection's own strand. A slow client blocks nothing: its connection costs only
+// memory, and little before its first byte.
 #pragma once
 
 #include <atomic>
@@ -27,7 +27,7 @@
 
 namespace pinwell::lumora {
 
-/// What every connection of a server shares. Outlives them all.
+/// The shared state of all connections of a server. Outlives them all.
 struct ConnectionContext {
     const HttpService& service;
     const TlsContext& tls;
@@ -42,19 +42,19 @@ struct ConnectionContext {
 
 class Connection : public std::enable_shared_from_this<Connection> {
   public:
-    /// Takes an accepted socket whose executor is a strand. `place` is released when the connection is gone.
+    /// Takes an accepted socket whose executor is a strand. `place` is released at the end of the connection.
     Connection(ConnectionContext& context, boost::asio::ip::tcp::socket socket, std::shared_ptr<void> place);
     ~Connection();
     Connection(const Connection&) = delete;
     Connection& operator=(const Connection&) = delete;
 
-    /// Enters the table and waits for the first byte; does nothing if the table has no place. Keeps itself
-    /// alive from here on.
+    /// Enters the table and waits for the first byte; does nothing if the table has no place. After this call
+    /// it keeps itself alive.
     void start();
 
   private:
     using ErrorCode = boost::system::error_code;
-    using Stream = boost::beast::flat_stream<TlsStream>;  // head and body of an answer in one record
+    using Stream = boost::beast::flat_stream<TlsStream>;  // head and body of a response in one record
     using Parser = boost::beast::http::request_parser<boost::beast::http::string_body>;
     using Response = boost::beast::http::response<boost::beast::http::span_body<const char>>;
     using Message = boost::beast::http::response<boost::beast::http::string_body>;
@@ -84,8 +84,8 @@ class Connection : public std::enable_shared_from_this<Connection> {
     template <class Work>
     std::optional<Answer> guarded(Work&& work);
 
-    /// One limit for whatever is waited for; a later call replaces it. The timer is set again only for an
-    /// earlier end: most limits are replaced long before.
+    /// Limits the time of any wait; a later call replaces the limit. The timer is set again only for an
+    /// earlier end, because most limits are replaced long before their end.
     void limitTime(std::chrono::milliseconds time);
     void setTimer();
     void onTimeout();
@@ -104,7 +104,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
     std::chrono::steady_clock::time_point deadline_;
     bool timerIsSet_ = false;
     std::string peer_;
-    std::optional<Client> client_;  // if the server asks for certificates
+    std::optional<Client> client_;  // if the server requires certificates
     ConnectionTable::Identifier identifier_ = 0;
     Phase phase_ = Phase::silent;
 

@@ -1,4 +1,4 @@
-// Which connections are open, and which one makes room when a peer has too many.
+// The open connections, and the one to close if a peer has too many.
 //
 // A connection is silent while it has no request under way: before and during the handshake, and between
 // requests. It waits while a request has arrived in part. Beyond the bound a peer loses its oldest silent
@@ -15,7 +15,7 @@
 
 namespace pinwell::lumora {
 
-/// May be used from any thread.
+/// For any thread.
 class ConnectionTable {
   public:
     using Identifier = std::uint64_t;
@@ -34,7 +34,7 @@ class ConnectionTable {
     /// The request is whole.
     void becomeBusy(Identifier connection);
 
-    /// The request is answered; the connection counts as the peer's newest silent one.
+    /// The response is complete: the connection becomes the peer's newest silent one.
     void becomeSilent(Identifier connection);
 
     void leave(Identifier connection);

@@ -8,10 +8,10 @@
 
 namespace pinwell::lumora {
 
-/// The port that `init` writes unless it is told another.
+/// The port that `init` writes by default.
 inline constexpr std::uint16_t kDefaultPort = 8443;
 
-/// The port of metrics unless another is asked for.
+/// The default port of metrics.
 inline constexpr std::uint16_t kDefaultMetricsPort = 9464;
 
 /// The port of the administration listener, unless another one is given.
@@ -21,13 +21,13 @@ inline constexpr std::uint16_t kDefaultAdminPort = 8444;
 inline constexpr std::uint16_t kHttpsPort = 443;
 
 /// A DNS name (RFC 1123 labels, 253 characters at most) in lower case, or an IPv4 or IPv6 address in its
-/// canonical text form and without brackets; nothing for any other text.
+/// canonical text form and without brackets; `nullopt` for any other text.
 std::optional<std::string> canonicalHost(std::string_view text);
 
-/// Whether a canonical host is an address rather than a name.
+/// Whether a canonical host is an address, not a name.
 bool isAddress(const std::string& host);
 
-/// Whether a canonical host is the address that stands for every interface.
+/// Whether a canonical host is the address of all interfaces.
 bool isWildcard(const std::string& host);
 
 struct Endpoint {
@@ -38,7 +38,7 @@ struct Endpoint {
 };
 
 /// "HOST:PORT", "[ADDRESS]:PORT", or either without the port, which is then `defaultPort`. A bare IPv6
-/// address is taken as a host without a port. Port 0 is allowed here: it asks for a free port.
+/// address is a host without a port. Port 0 is allowed here: it requests a free port.
 std::optional<Endpoint> parseEndpoint(std::string_view text, std::uint16_t defaultPort);
 
 /// "HOST:PORT", an IPv6 address in brackets.

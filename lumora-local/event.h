@@ -1,20 +1,20 @@
-// The log of a record service: what was done to which record, when, by whom and why.
+// The log of a record service: each change of a record, with its time, actor and reason.
 //
-// Events are never changed and never removed. Each carries the hash of the one before it, so that an event
-// that was altered, removed or put in between shows when the chain is walked. An event's hash is SHA-256 over
-// these fields, in this order, each as its length in decimal, a colon, its bytes and a comma:
+// Events are never changed or removed. Each event has the hash of the previous one. So a check of the chain
+// finds an altered, removed or inserted event. An event's hash is SHA-256 over these fields, in this order,
+// each as its length in decimal, a colon, its bytes and a comma:
 //
 //   previous     the previous event's hash, 64 lower-case hexadecimal digits; 64 zeros for the first event
 //   time         RFC 3339 in UTC, whole seconds: 2026-11-20T19:55:00Z
-//   actor        who did it: a login name, or the name in a client's certificate
+//   actor        a login name, or the name in a client's certificate
 //   action       issued, reissued, revoked, reinstated or refused
 //   environment  production or development
 //   record       the record's name; empty if a refused request named none
-//   label        what the record was issued for
+//   label        the artefact's name for people
 //   reason       compromised, superseded, withdrawn or unspecified for a revocation; else empty
 //   comment      free text; may be empty
-//   ticket       SHA-256 of the ticket that the record got, 64 lower-case hexadecimal digits; empty if
-//   refused
+//   ticket       SHA-256 of the record's new ticket, 64 lower-case hexadecimal digits;
+//                empty if refused
 #pragma once
 
 #include <optional>
@@ -27,8 +27,8 @@
 
 namespace pinwell::lumora {
 
-/// What happened to a record. `refused`: nothing; somebody who may not, or asked for what cannot be, tried to
-/// change it.
+/// The change of a record. `refused`: none; a client without the right, or with an impossible request, tried
+/// to change it.
 enum class Action { issued, reissued, revoked, reinstated, refused };
 
 /// Why a record was revoked.

@@ -1,4 +1,4 @@
-// How an operation of the record service fails: one line for a person and the exit status that goes with it.
+// A failed operation of the record service: one line for a person, and the exit status.
 #pragma once
 
 #include <sysexits.h>

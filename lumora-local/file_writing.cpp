@@ -21,7 +21,7 @@ using foundation::ByteView;
 using foundation::FileDescriptor;
 using foundation::format;
 
-/// Makes a call again as long as a signal interrupts it.
+/// Repeats a call while a signal interrupts it.
 template <class Call>
 auto uninterrupted(Call call) {
     for (;;) {
@@ -96,7 +96,7 @@ void flushDirectory(const std::string& path) {
     constexpr int kFlags = O_RDONLY | O_DIRECTORY | O_CLOEXEC;
     const FileDescriptor directory(uninterrupted([&] { return ::open(path.c_str(), kFlags); }));
     if (!directory) throw failureFromErrno(EX_IOERR, "open", path);
-    // Some file systems have nothing to flush for a directory and say so.
+    // Some file systems cannot flush a directory, and return this error.
     if (uninterrupted([&] { return ::fsync(directory.get()); }) != 0 && errno != EINVAL)
         throw failureFromErrno(EX_IOERR, "flush", path);
 }
@@ -139,7 +139,7 @@ void PendingDirectory::publish() {
     if (std::rename(path_.c_str(), finalPath_.c_str()) != 0) {
         throw failureFromErrno(EX_CANTCREAT, "create", finalPath_);
     }
-    path_ = finalPath_;  // what is removed again when it cannot be flushed
+    path_ = finalPath_;  // to be removed if it cannot be flushed
     flushDirectory(parentOf(finalPath_));
     published_ = true;
 }

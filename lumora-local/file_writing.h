@@ -1,4 +1,4 @@
-// Writing whole files so that a reader sees all of one or nothing, and never through a symbolic link.
+// Writes whole files: a reader sees all of a file or no file. Never follows a symbolic link.
 #pragma once
 
 #include <sys/types.h>
@@ -9,45 +9,45 @@
 
 namespace pinwell::lumora {
 
-/// Makes a file that must not exist yet, flushed to the disk before this returns. `mode` is subject to the
-/// umask. Throws Failure (EX_CANTCREAT when it cannot be made, EX_IOERR when it cannot be written), and then
-/// no file is left that was not there before.
+/// Makes a new file, and flushes it to the disk before it returns. `mode` is subject to the umask. Throws
+/// Failure (EX_CANTCREAT if it cannot be made, EX_IOERR if it cannot be written). Then no new file
+/// remains.
 void writeNewFile(const std::string& path, foundation::ByteView contents, mode_t mode);
 
-/// Puts `contents` in the place of whatever file stands at `path`, by one rename of a flushed sibling.
-/// Throws Failure, and then the old file is untouched.
+/// Replaces the file at `path` by `contents`, by one rename of a flushed sibling. If it throws Failure, the
+/// old file is unchanged.
 void replaceFile(const std::string& path, foundation::ByteView contents, mode_t mode);
 
-/// Makes one directory that must not exist yet. Throws Failure.
+/// Makes a new directory. Throws Failure.
 void makeDirectory(const std::string& path, mode_t mode);
 
-/// Makes a symbolic link that must not exist yet. Throws Failure.
+/// Makes a new symbolic link. Throws Failure.
 void makeLink(const std::string& path, const std::string& target);
 
 /// Flushes a directory, so that the names in it survive a crash. Throws Failure.
 void flushDirectory(const std::string& path);
 
-/// A name for a hidden sibling of `path` that nothing else uses; nothing is made.
+/// An unused name for a hidden sibling of `path`; nothing is made.
 std::string temporarySiblingOf(const std::string& path);
 
-/// `path` and `suffix`, with a number behind them where there is such a name already.
+/// `path` and `suffix`, followed by a number if this name exists already.
 std::string freeName(const std::string& path, const std::string& suffix);
 
 /// A directory under construction beside its final place. It is removed again unless it is published.
 class PendingDirectory {
   public:
-    /// Makes the directory. Throws Failure (EX_CANTCREAT) when it cannot, or when `finalPath` is taken by
-    /// anything but an empty directory.
+    /// Makes the directory. Throws Failure (EX_CANTCREAT) if it cannot, or if `finalPath` is anything except
+    /// an empty directory.
     PendingDirectory(std::string finalPath, mode_t mode);
     ~PendingDirectory();
     PendingDirectory(const PendingDirectory&) = delete;
     PendingDirectory& operator=(const PendingDirectory&) = delete;
 
-    /// Where to build, until it is published.
+    /// The place to build in, until it is published.
     const std::string& path() const noexcept { return path_; }
 
-    /// Moves it to its final place in one step. Throws Failure when that has been taken meanwhile, for a
-    /// rename of a directory replaces nothing but an empty directory, or when the move cannot be made
+    /// Moves it to its final place in one step. Throws Failure if the place has been taken,
+    /// because a rename replaces only an empty directory, or if the move cannot be made
     /// durable.
     void publish();
 

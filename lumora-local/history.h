@@ -17,7 +17,7 @@ using TextSink = std::function<void(std::string_view)>;
 /// {"events": [...]}. Throws Failure.
 void writeEvents(RecordStore& store, const EventQuery& query, bool asJson, const TextSink& sink);
 
-/// What a check of the whole history found in order.
+/// The result of a successful check of the whole history.
 struct HistorySummary {
     std::size_t events = 0;
     std::string head;  // hash of the last event

@@ -8,7 +8,7 @@ namespace {
 
 namespace http = boost::beast::http;
 
-// Longer request targets are refused before anything looks at them.
+// Longer request targets are refused before any other check.
 constexpr std::size_t kMaximumTargetLength = 2048;
 
 template <class Text>

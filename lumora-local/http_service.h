@@ -1,4 +1,4 @@
-// What a server does with HTTP requests, without a socket in sight.
+// The handling of HTTP requests, without sockets.
 #pragma once
 
 #include <memory>
@@ -15,8 +15,8 @@ namespace pinwell::lumora {
 
 inline constexpr std::size_t kMaximumBodySize = 1024 * 1024;
 
-/// A request up to its body. `target` is as it stood in the request line; header values are empty when
-/// absent.
+/// A request up to its body. `target` is the request line's, unchanged; missing header values are
+/// empty.
 struct RequestHead {
     std::string method;
     std::string target;
@@ -24,7 +24,7 @@ struct RequestHead {
     std::string contentType;
     std::string contentEncoding;
     std::optional<std::string> idempotencyKey{};  // several headers of this name are joined by ", "
-    std::string client{};  // common name of its certificate, if the server asks for one
+    std::string client{};  // common name of its certificate, if the server requires one
 };
 
 struct Answer {
@@ -32,34 +32,34 @@ struct Answer {
     std::string contentType = "application/json";
     std::string body;
     std::shared_ptr<const foundation::Data>
-        asset;  // in the place of `body`; downloads of one ticket share it
+        asset;  // used instead of `body`; downloads of one ticket share it
     std::vector<std::pair<std::string, std::string>> headers;
-    std::vector<std::string> records;   // the names that were looked up, for the log
+    std::vector<std::string> records;   // the looked-up names, for the log
     std::size_t recordsFound = 0;       // of them
-    std::size_t recordsFromMemory = 0;  // of those found
+    std::size_t recordsFromMemory = 0;  // of the found records
 };
 
-/// Calls may come from any thread, several at a time. What answerHead() and answerBody() throw becomes the
-/// answer of refuseForNow().
+/// Calls may come from any thread, several at a time. An exception of answerHead() or answerBody() becomes
+/// the response of refuseForNow().
 class HttpService {
   public:
     virtual ~HttpService() = default;
 
-    /// The answer as far as the head decides it; `nullopt` if the body must be read and handed to
+    /// The response, if the head is enough to decide it; `nullopt` if the body must be read and passed to
     /// answerBody().
     virtual std::optional<Answer> answerHead(const RequestHead& head) const = 0;
 
-    /// The answer to a request whose head was accepted.
+    /// The response to a request whose head was accepted.
     virtual Answer answerBody(const RequestHead& head, std::string_view body) const = 0;
 
-    /// The refusal of a request that is at fault by the rules of HTTP alone (http_rules.h). `head` is null if
-    /// it was not read.
+    /// The refusal of a request that breaks the rules of HTTP (http_rules.h). `head` is null if it was not
+    /// read.
     virtual Answer refuse(int status, const RequestHead* head) const = 0;
 
-    /// A refusal that time may mend: 503, with Retry-After.
+    /// A temporary refusal: 503, with Retry-After.
     virtual Answer refuseForNow(std::string_view reason) const = 0;
 
-    /// For counting. Says nothing about what the answer will be.
+    /// For counting. Independent of the response.
     virtual RequestKind kindOf(std::string_view) const { return RequestKind::other; }
 };
 

@@ -21,13 +21,13 @@ using PrivateKeyInfoHandle = foundation::Handle<PKCS8_PRIV_KEY_INFO, PKCS8_PRIV_
 using AlgorithmHandle = foundation::Handle<X509_ALGOR, X509_ALGOR_free>;
 using EncryptedKeyHandle = foundation::Handle<X509_SIG, X509_SIG_free>;
 
-// RFC 7914: 16 MiB for each guess, which is as much as the library allows by itself.
+// RFC 7914: 16 MiB for each guess, the library's default maximum.
 constexpr int kSaltSize = 16;
 constexpr std::uint64_t kScryptCost = 16384;
 constexpr std::uint64_t kScryptBlocks = 8;
 constexpr std::uint64_t kScryptLanes = 1;
 
-// What the library's question for a passphrase is answered from. Nothing is thrown through the library.
+// The passphrase for the library's callback. No exception may pass through the library.
 struct PassphraseRequest {
     const std::string& file;
     bool asked;
@@ -56,7 +56,7 @@ int givePassphrase(char* buffer, int size, int, void* context) {
 KeyHandle readKeyFile(const std::string& path, const std::string& passphraseFile) {
     foundation::WipedRoom<kMaximumKeyFile + 1> room;
     const auto length = static_cast<int>(secretOf(foundation::readSecretFile(path, room.bytes())));
-    // Reads from the buffer itself, and copies nothing.
+    // Reads from the buffer itself, without a copy.
     const BioHandle pem(BIO_new_mem_buf(room.bytes().data(), length));
     require(pem != nullptr, "read a PEM file");
     PassphraseRequest request{passphraseFile, false, nullptr};

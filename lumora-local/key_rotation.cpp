@@ -30,7 +30,7 @@ std::string retiredHint(const std::string& key) {
     return format("The earlier key is still in %@; remove it once nothing reads it.", key);
 }
 
-/// "ticket-signer-20261122T081500Z": a name in the service's folder that nothing has yet.
+/// "ticket-signer-20261122T081500Z": an unused name in the service's folder.
 std::string freshName(const ServiceDirectory& directory, const std::string& stem, Date now) {
     std::string stamp = toRfc3339(now);
     std::erase_if(stamp, [](char c) { return c == '-' || c == ':'; });
@@ -45,7 +45,7 @@ std::string freshName(const ServiceDirectory& directory, const std::string& stem
     return name;
 }
 
-/// Files that are removed again unless all goes well.
+/// Files that are removed again unless everything succeeds.
 class NewFiles {
   public:
     explicit NewFiles(const ServiceDirectory& directory) : directory_(directory) {}
@@ -117,7 +117,7 @@ Array chainWith(const ServiceDirectory& directory, const std::string& certificat
     return chain;
 }
 
-/// Puts key and chain into service.json; a request that waits for its certificate stays unless it is done.
+/// Writes key and chain into service.json; a waiting request remains unless it is fulfilled.
 void nameSigner(const ServiceDirectory& directory, const std::string& key, const Array& chain,
                 bool answersRequest) {
     directory.changeSettings([&](Dictionary& settings) {
@@ -156,7 +156,7 @@ RotationReport requestNextSigner(const ServiceDirectory& directory, const std::s
             format("Bring it in: lumora-local certify %@ CHAIN", directory.path())};
 }
 
-/// Adds a root to the platform directory unless it is there; says so.
+/// Adds a missing root to the platform directory, and reports it.
 void publishRoot(const ServiceDirectory& directory, X509* root, const std::string& name, NewFiles& files,
                  RotationReport& report) {
     for (const std::string& path :

@@ -1,9 +1,9 @@
-// Renewing the keys of a service, and bringing in a certificate from an authority elsewhere.
+// Renews the keys of a service, and installs certificates of another authority.
 //
-// New files get names of their own; service.json is rewritten last, in one step, and names them. So whoever
-// reads keys and certificates meanwhile finds either the old ones or the new ones, and the old files stay for
-// those who have read the old service.json. A ticket holds its own chain up to the root, so that earlier
-// tickets stay genuine for as long as clients trust that root.
+// New files get new names. Last, service.json is replaced in one step and names them. So a reader finds
+// either the old keys and certificates or the new ones. The old files remain for processes that have read the
+// old service.json. A ticket contains its own chain, so earlier tickets stay genuine while clients trust the
+// root.
 #pragma once
 
 #include <string>
@@ -14,12 +14,12 @@
 
 namespace pinwell::lumora {
 
-/// What was changed, as lines for a person.
+/// The changes, as lines for a person.
 using RotationReport = std::vector<std::string>;
 
 struct SignerRotation {
     std::string tokenKey;     // a pkcs11: URI whose key becomes the signer's; empty: a fresh key in a file
-    std::string requestFile;  // made: a request for a certificate from elsewhere; nothing else changes yet
+    std::string requestFile;  // makes a request for another authority's certificate; nothing else changes yet
 };
 
 /// Gives the signer a new key, certified by the service's own intermediate certificate. Throws Failure:
@@ -27,15 +27,15 @@ struct SignerRotation {
 RotationReport rotateSigner(const ServiceDirectory& directory, const SignerRotation& rotation,
                             foundation::Date now);
 
-/// Gives the server a new key and certificate for the hosts of service.json. `rootDirectory` holds root.key;
-/// empty: it is in the service. Throws Failure.
+/// Gives the server a new key and certificate for the hosts of service.json. `rootDirectory` has root.key; if
+/// empty, the service has it. Throws Failure.
 RotationReport rotateServer(const ServiceDirectory& directory, const std::string& rootDirectory,
                             foundation::Date now);
 
-/// Takes the three certificates of the PEM file `chainFile`, signer first, for the key that was requested
-/// last, or for `key` (a file or a pkcs11: URI) if that is not empty. A root that the platform directory does
-/// not have is added to it. Throws Failure (EX_DATAERR) if the chain is none that clients accept, or is not
-/// for the key; nothing is changed then.
+/// Installs the three certificates of the PEM file `chainFile`, signer first. They are for the last requested
+/// key, or for `key` (a file or a pkcs11: URI) if that is not empty. A new root is added to the platform
+/// directory. Throws Failure (EX_DATAERR) if clients would refuse the chain, or it is for another key. Then
+/// nothing is changed.
 RotationReport certifySignerElsewhere(const ServiceDirectory& directory, const std::string& chainFile,
                                       const std::string& key, foundation::Date now);
 

@@ -43,8 +43,7 @@ FileDescriptor listenAt(const addrinfo& address) {
     FileDescriptor socket(::socket(address.ai_family, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
     if (!socket) return {};
     const int yes = 1;
-    // Lets a restarted service have its port back while old connections time out. Two services never share a
-    // port.
+    // Lets a restarted service use its port while old connections time out. Two services never share a port.
     ::setsockopt(socket.get(), SOL_SOCKET, SO_REUSEADDR, &yes, sizeof yes);
     if (::bind(socket.get(), address.ai_addr, address.ai_addrlen) != 0) return {};
     if (::listen(socket.get(), kBacklog) != 0) return {};

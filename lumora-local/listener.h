@@ -9,11 +9,11 @@ namespace pinwell::lumora {
 /// One thread at a time.
 class Listener {
   public:
-    /// Binds and listens; port 0 lets the system choose one. A name is resolved, and the first of its
-    /// addresses that can be bound is taken. Throws Failure (EX_UNAVAILABLE), which names the address.
+    /// Binds and listens; port 0 lets the system choose one. A name is resolved, and its first usable address
+    /// is taken. Throws Failure (EX_UNAVAILABLE), which names the address.
     explicit Listener(const Endpoint& endpoint);
 
-    /// The host as it was asked for, with the port that was bound.
+    /// The requested host, with the bound port.
     const Endpoint& endpoint() const noexcept { return endpoint_; }
 
     /// Non-blocking; the listener keeps it until release().

@@ -27,12 +27,12 @@ constexpr std::string_view kFileNameToken = "${f}";
 constexpr std::size_t kAssetIdentifierLength = 64;  // SHA-256 in hexadecimal
 constexpr std::size_t kMaximumFileNameLength = 200;
 
-// A question to a database costs a message there and back. The tickets that come back are in memory at once.
+// A query costs one round trip to the database. All its tickets are in memory at once.
 constexpr std::size_t kNamesAtOnce = 16;
 
 std::string json(const Value& value) {
     const foundation::Result<Data> document = foundation::serializeJSON(value);
-    // What is said here is text of our own or text that came out of a JSON parser.
+    // The values are our own text, or text from a JSON parser.
     return document ? foundation::toString(*document) : std::string("{}");
 }
 
@@ -46,7 +46,7 @@ Answer methodNotAllowed(const char* allowed) {
     return answer;
 }
 
-/// Between the prefix and the suffix stand the container and the environment.
+/// The container and the environment are between the prefix and the suffix.
 std::optional<Environment> environmentOfLookup(std::string_view path) {
     if (!path.starts_with(kDatabasePrefix)) return std::nullopt;
     path.remove_prefix(kDatabasePrefix.size());
@@ -77,7 +77,7 @@ std::optional<std::string> assetIdentifier(std::string_view path) {
     return std::string(path.substr(0, slash));
 }
 
-/// The names asked for, or why they cannot be had.
+/// The requested names, or the reason for a refusal.
 struct LookupBody {
     std::vector<std::string> names;
     std::optional<Answer> refused;
@@ -199,7 +199,7 @@ Answer LookupService::answerLookup(const RequestHead& head, std::string_view bod
     if (request.refused) return *std::move(request.refused);
     const std::optional<FoundByName> found = findRecords(head, *environment, request.names, state);
     if (!found) return answerTooLarge();
-    // Answers share what they repeat until they are put together.
+    // Responses share their repeated parts until they are joined.
     constexpr std::string_view kBegin = "{\"records\":[";
     constexpr std::string_view kEnd = "]}";
     std::size_t size = kBegin.size() + kEnd.size();
@@ -230,7 +230,7 @@ Answer LookupService::answerLookup(const RequestHead& head, std::string_view bod
     return answer;
 }
 
-/// A name that comes again is looked up once. `nullopt` if the records together are too large for an answer.
+/// A repeated name is looked up once. `nullopt` if the records together are too large for a response.
 std::optional<LookupService::FoundByName> LookupService::findRecords(
     const RequestHead& head, Environment environment, const std::vector<std::string>& names,
     std::optional<std::uint64_t> state) const {
@@ -257,8 +257,8 @@ std::optional<LookupService::FoundByName> LookupService::findRecords(
     return found;
 }
 
-/// A record as it is in an answer. Kept is only what is the same for all who ask: an asset's URL has the name
-/// by which its client came, and anybody can ask for names that are not there.
+/// A record in the form of a response. Only parts that are the same for all clients are cached: an asset's
+/// URL has the client's name for the service, and anybody can request missing names.
 LookupService::Found LookupService::makeRecord(const RequestHead& head, Environment environment,
                                                const std::string& name,
                                                const std::optional<Delivery>& delivery,
@@ -291,8 +291,7 @@ Answer LookupService::answerAsset(std::string_view path) const {
 }
 
 std::shared_ptr<const Data> LookupService::sharedAsset(const std::string& identifier) const {
-    // The record decides whether there is such an asset; bytes that are on their way to somebody are used
-    // again.
+    // The record decides whether there is such an asset; downloads of the same asset share its bytes.
     std::optional<Data> ticket = source_.findAsset(identifier);
     if (!ticket) return nullptr;
     const std::lock_guard lock(assetsMutex_);
@@ -325,7 +324,7 @@ Answer LookupService::answerReadiness() const {
 }
 
 std::string LookupService::assetUrlTemplate(const RequestHead& head, const std::string& identifier) const {
-    // A client that came by one of our names can come again by it; any other text is not repeated.
+    // A client that used one of our names can use it again; any other text is not repeated.
     const std::optional<Endpoint> asked = parseEndpoint(head.host, kHttpsPort);
     const bool ours =
         asked && asked->port != 0 && std::find(hosts_.begin(), hosts_.end(), asked->host) != hosts_.end();

@@ -1,4 +1,4 @@
-// The service's protocol, request to answer, without a socket in sight.
+// The service's protocol, from request to response, without sockets.
 //
 //   POST /database/1/CONTAINER/ENVIRONMENT/public/records/lookup    application/json
 //        {"records": [{"recordName": "2/2/..."}, ...]}
@@ -7,9 +7,9 @@
 //        {"recordName": N, "fields": {"signedTicketAsset": {"type": "ASSET",
 //                                     "value": {"downloadURL": "https://.../${f}", "size": BYTES}}}}
 //        {"recordName": N, "serverErrorCode": "NOT_FOUND", "reason": "Record not found"}
-//   GET  /assets/IDENTIFIER/NAME    the ticket's bytes; NAME is the client's choice in the place of ${f}
-//   GET  /healthz                   {"status": "ok", "records": N}: the process answers, and the records are
-//   there GET  /readyz                    {"status": "ready"}, or 503 if lookups or changes would fail
+//   GET  /assets/IDENTIFIER/NAME    the ticket's bytes; NAME is the client's text for ${f}
+//   GET  /healthz                   {"status": "ok", "records": N}, or 503 if the records cannot be read
+//   GET  /readyz                    {"status": "ready"}, or 503 if lookups or changes would fail
 //
 // Every refusal is a JSON object {"serverErrorCode": C, "reason": R} with a 4xx or 5xx status.
 #pragma once
@@ -37,23 +37,23 @@ inline constexpr std::string_view kContainer = "com.ostrel.tm.ticket-delivery";
 inline constexpr std::size_t kMaximumRecordsPerRequest = 200;
 inline constexpr std::size_t kMaximumRecordNameLength = 255;
 
-/// A lookup whose answer would be longer is refused: its client asks for fewer records at a time.
+/// A lookup with a longer response is refused: its client must request fewer records at a time.
 inline constexpr std::size_t kMaximumAnswerSize = 8 * 1024 * 1024;
 
 /// A refusal in the form that all refusals have.
 Answer refusal(int status, std::string_view code, std::string_view reason);
 
-/// A refusal that time may mend: 503, with Retry-After.
+/// A temporary refusal: 503, with Retry-After.
 Answer refusalForNow(std::string_view reason);
 
-/// Says why the service cannot do all of its work although the records can be read; `nullopt` if it can. From
-/// any thread.
+/// The reason why the service cannot do all of its work although the records can be read; `nullopt` if it
+/// can. From any thread.
 using Obstacle = std::function<std::optional<std::string>()>;
 
 class LookupService final : public HttpService {
   public:
-    /// `hosts` are the names that the server's certificate speaks for; `fallback` is where the service can be
-    /// reached when a request does not say by which of them it came.
+    /// `hosts` are the names in the server's certificate; `fallback` is the service's place if a request does
+    /// not name one of them.
     LookupService(RecordSource& source, std::vector<std::string> hosts, Endpoint fallback,
                   Obstacle obstacle = {})
         : source_(source),
@@ -61,11 +61,11 @@ class LookupService final : public HttpService {
           fallback_(std::move(fallback)),
           obstacle_(std::move(obstacle)) {}
 
-    /// The answer as far as the head decides it; nothing when the body must be read and handed to
+    /// The response, if the head is enough to decide it; `nullopt` if the body must be read and passed to
     /// answerLookup. From any thread.
     std::optional<Answer> answerHead(const RequestHead& head) const override;
 
-    /// The answer to a lookup whose head was accepted. From any thread.
+    /// The response to a lookup whose head was accepted. From any thread.
     Answer answerLookup(const RequestHead& head, std::string_view body) const;
     Answer answerBody(const RequestHead& head, std::string_view body) const override {
         return answerLookup(head, body);
@@ -78,7 +78,7 @@ class LookupService final : public HttpService {
   private:
     struct Found {
         std::shared_ptr<const KeptAnswer> record;
-        bool isForAll = false;  // whoever asks gets the same
+        bool isForAll = false;  // the same for all clients
         bool isKnown = false;
         bool fromMemory = false;
     };

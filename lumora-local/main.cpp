@@ -38,7 +38,7 @@ namespace {
 using namespace pinwell;
 using namespace pinwell::lumora;
 
-/// What the command line says, as text.
+/// The command line's values, as text.
 struct Arguments {
     std::string directory;
     std::vector<std::string> hosts;
@@ -105,8 +105,8 @@ ServiceDirectory openService(const Arguments& arguments) {
     return ServiceDirectory::open(requireDirectory(arguments.directory));
 }
 
-/// Artefacts are read beside the key that signs tickets. Before one is: what the service and the artefacts
-/// need, and no network.
+/// The process that reads artefacts also has the signing key. So it first gives up all rights except for the
+/// files of service and artefacts. It needs no network.
 void giveUpRights(const Arguments& arguments, const ServiceDirectory& directory) {
     using sandbox::Access;
     keepSecurityLibrary();
@@ -163,7 +163,7 @@ void runList(const Arguments& arguments) {
     writeText(arguments.asJson ? recordsAsJson(records) : describeRecords(records));
 }
 
-/// `--head DIR` means the directory: what a hash looks like is known.
+/// `--head DIR` means the directory: a hash has a known form.
 void sortOutHead(Arguments& arguments) {
     const bool isHash = arguments.head.size() == hashBeforeTheFirstEvent().size() &&
                         arguments.head.find_first_not_of("0123456789abcdef") == std::string::npos;
@@ -402,10 +402,10 @@ int run(int argc, char** argv) {
 int main(int argc, char** argv) {
     trust::wipeWhatOpenSSLFrees();
     foundation::occupyStandardStreams();
-    sandbox::forbidCoreDumps();  // they would hold the keys
+    sandbox::forbidCoreDumps();  // they would contain the keys
     // A client that has gone away is an error of one write, not the end of the service.
     std::signal(SIGPIPE, SIG_IGN);
-    // So is a file that may not grow any more.
+    // A file over the size limit is also an error, not a signal.
     std::signal(SIGXFSZ, SIG_IGN);
     try {
         return run(argc, argv);

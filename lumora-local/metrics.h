@@ -18,7 +18,7 @@ namespace pinwell::lumora {
 
 inline constexpr std::string_view kMetricsContentType = "text/plain; version=0.0.4; charset=utf-8";
 
-/// What is known of a service beside its counts.
+/// Facts about a service beside its counts.
 struct ServiceFacts {
     std::string version;
     foundation::Date started;

@@ -1,4 +1,4 @@
-// In the place of metrics.cpp in a build without the library that writes them.
+// Replaces metrics.cpp in a build without the library that writes metrics.
 #include "lumora-local/failure.h"
 #include "lumora-local/metrics.h"
 

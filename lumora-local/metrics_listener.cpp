@@ -61,7 +61,7 @@ MetricsResponse answerScrape(const http::request<http::empty_body>& request,
     }
 }
 
-/// One request and its answer.
+/// One request and its response.
 class Scrape : public std::enable_shared_from_this<Scrape> {
   public:
     Scrape(Tcp::socket socket, const std::function<std::string()>& text, std::shared_ptr<void> place)
@@ -90,7 +90,7 @@ class Scrape : public std::enable_shared_from_this<Scrape> {
         });
     }
 
-    /// Waits for the peer's end: to close before it has read all would take the answer back.
+    /// Waits for the peer's end: an early close would discard the unread response.
     void finish() {
         ErrorCode ignored;
         stream_.socket().shutdown(Tcp::socket::shutdown_send, ignored);
@@ -129,7 +129,7 @@ class MetricsListener::Loop {
     Loop& operator=(const Loop&) = delete;
 
   private:
-    /// What a handler throws ends that handler alone.
+    /// An exception of a handler ends only that handler.
     void run() {
         for (;;) {
             try {
@@ -160,7 +160,7 @@ class MetricsListener::Loop {
         });
     }
 
-    /// Comes back when the connection ends.
+    /// Returned when the connection ends.
     std::shared_ptr<void> takePlace() {
         --free_;
         return {nullptr, [this](void*) {

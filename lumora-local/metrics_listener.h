@@ -1,8 +1,8 @@
-// GET /metrics over plain HTTP, on a socket and a thread of its own.
+// GET /metrics over plain HTTP, with its own socket and thread.
 //
-// Whoever reaches the socket may read the metrics: they name no client and no record. A connection brings one
-// request. Few connections are served at a time, each for a few seconds; others wait in the kernel's queue,
-// and never in the way of lookups.
+// Everybody who reaches the socket may read the metrics: they name no client and no record. A connection has
+// one request. Few connections are served at a time, each for a few seconds. Others wait in the kernel's
+// queue, and never delay lookups.
 #pragma once
 
 #include <functional>
@@ -15,8 +15,8 @@ namespace pinwell::lumora {
 
 class MetricsListener {
   public:
-    /// Takes the listener's socket. `text` returns the metrics; it is called on the thread of this class, one
-    /// call at a time, and may throw.
+    /// Takes the listener's socket. `text` returns the metrics. This class's thread calls it, one call at a
+    /// time; it may throw.
     MetricsListener(Listener& listener, std::function<std::string()> text);
 
     /// Ends the thread, and the connections that are open.

@@ -17,7 +17,7 @@ using foundation::asBytes;
 using foundation::Data;
 using foundation::format;
 
-/// A digest of items in their order: each takes in the digest of those before it.
+/// A digest of items in their order: each digest covers the previous one.
 class RunningDigest {
   public:
     void add(const std::string& item) {

@@ -15,7 +15,7 @@ struct Migration {
     std::string oldDescription;  // path of the service.json of before
 };
 
-/// What two stores have in common if they hold the same: the same digest, and the same numbers.
+/// The same for two stores with equal contents: the digest and the numbers.
 struct ContentsSummary {
     std::size_t records = 0;
     std::size_t events = 0;
@@ -25,12 +25,12 @@ struct ContentsSummary {
 ContentsSummary summarize(RecordStore& store);
 
 /// Checks the service's records, copies them with their events to the database at `url`, reads both again and
-/// compares them, and then lets service.json name the database. Nobody can change the records meanwhile. The
-/// copy is one transaction; if the process ends early, the service goes on with its old store.
+/// compares them. Then it lets service.json name the database. Nobody can change the records meanwhile. The
+/// copy is one transaction; if the process ends early, the service continues with its old store.
 ///
-/// The database has to be empty, or to hold the very same as the store: so a migration that was cut off after
-/// its copy can be repeated. Throws Failure; EX_CONFIG if the database cannot be used or the log is broken,
-/// EX_CANTCREAT if the database holds something else.
+/// The database must be empty, or have the same contents as the store, so that a migration that was
+/// interrupted after its copy can be repeated. Throws Failure; EX_CONFIG if the database is unusable or the
+/// log is broken, EX_CANTCREAT if the database has other contents.
 Migration migrate(const ServiceDirectory& directory, const std::string& url);
 
 }  // namespace pinwell::lumora

@@ -24,7 +24,7 @@ using ExtensionHandle = foundation::Handle<X509_EXTENSION, X509_EXTENSION_free>;
 using BioHandle = foundation::Handle<BIO, BIO_free_all>;
 using DigestContextHandle = foundation::Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
 
-/// The library speaks of unsigned characters where we say bytes.
+/// The library uses unsigned characters for bytes.
 inline const unsigned char* octets(foundation::ByteView bytes) {
     return reinterpret_cast<const unsigned char*>(bytes.data());
 }
@@ -32,7 +32,7 @@ inline unsigned char* octets(foundation::Data& data) {
     return reinterpret_cast<unsigned char*>(data.data());
 }
 
-/// What the library last complained about, as the failure of `action`; its queue is empty afterwards.
+/// The library's last error, as the failure of `action`; empties the library's queue.
 inline Failure openSSLFailure(std::string_view action) {
     std::array<char, 256> text{};
     ERR_error_string_n(ERR_get_error(), text.data(), text.size());
@@ -40,7 +40,7 @@ inline Failure openSSLFailure(std::string_view action) {
     return {EX_SOFTWARE, foundation::format("cannot %@: %@", action, std::string_view(text.data()))};
 }
 
-/// Holds a library call to its success value.
+/// Throws unless a library call has returned its success value.
 inline void require(bool succeeded, std::string_view action) {
     if (!succeeded) throw openSSLFailure(action);
 }
@@ -57,7 +57,7 @@ foundation::Data encodeDer(int (*encoder)(Object*, unsigned char**), Object* obj
     return der;
 }
 
-/// What was written into a BIO in memory.
+/// The text written into a BIO in memory.
 inline std::string textOf(BIO* memory) {
     char* text = nullptr;
     const long length = BIO_get_mem_data(memory, &text);

@@ -16,11 +16,11 @@ using foundation::Date;
 using foundation::format;
 using foundation::markupText;
 
-/// Names and what a form shows for them.
+/// Values of a form, and their texts.
 using Choices = std::array<std::pair<std::string_view, std::string_view>, 3>;
 constexpr Choices kSearches{{{"label", "Label"}, {"name", "Name"}, {"hash", "Hash"}}};
 
-/// Text of the store, whose direction of writing does not turn what is around it.
+/// Text of the store. Its direction of writing does not change the text around it.
 std::string isolated(std::string_view text) {
     return "<bdi>" + markupText(text) + "</bdi>";
 }
@@ -66,7 +66,7 @@ std::string formOf(const SearchForm& form, bool isAtFault = false) {
            "that it lists. Labels tell capitals from small letters.</p>\n</form>\n";
 }
 
-// Where there is little room, the line breaks between date and time.
+// On a narrow screen, the line breaks between date and time.
 std::string timeOf(Date date) {
     const std::string exact = toRfc3339(date);
     const std::size_t middle = exact.find('T');

@@ -1,8 +1,8 @@
-// The page for people: what records there are, in what state, and what became of each. Read only.
+// The page for people: the records, their states and their histories. Read only.
 //
-// Every function returns a whole document. It needs no script and loads nothing but /style.css; the policy in
-// its headers (page_routes.h) allows nothing else. Text from the store is escaped, without control characters
-// and marks that turn the direction of writing.
+// Every function returns a whole document. It needs no script and loads only /style.css; the policy in its
+// headers (page_routes.h) allows nothing else. Text from the store is escaped, and has no control characters
+// and no marks that change the direction of writing.
 #pragma once
 
 #include <optional>
@@ -15,7 +15,7 @@
 
 namespace pinwell::lumora {
 
-/// What the search form holds.
+/// The contents of the search form.
 struct SearchForm {
     std::string by = "label";  // "name", "label" or "hash"
     std::string text;          // empty: every record
@@ -46,14 +46,14 @@ std::string homePage(const StoreFacts& facts, const std::string& client);
 std::string resultsPage(const ResultsView& view, const std::string& client);
 std::string recordPage(const RecordView& view, const std::string& client);
 
-/// Why there is nothing to show, above the form as it was sent.
+/// An error message above the form with its input.
 std::string faultPage(const std::string& title, const std::string& text, const SearchForm& form,
                       const std::string& client);
 
 /// The path of a record's page, with its query.
 std::string recordTarget(const std::string& name, Environment environment);
 
-/// What /style.css has.
+/// The contents of /style.css.
 std::string_view pageStyle();
 
 }  // namespace pinwell::lumora

@@ -15,7 +15,7 @@ using foundation::format;
 
 constexpr std::string_view kRecordPath = "/records/";
 
-/// Whatever gets into a page, a browser loads the style sheet and sends the form, and does nothing else.
+/// Whatever the contents of a page, a browser only loads the style sheet and sends the form.
 constexpr const char* kPolicy =
     "default-src 'none'; style-src 'self'; form-action 'self'; base-uri 'none'; frame-ancestors 'none'";
 
@@ -37,7 +37,7 @@ std::string valueIn(const Query& query, std::string_view name) {
     return found == query.end() ? std::string() : found->second;
 }
 
-/// Without the blanks that come along when text is pasted.
+/// Without the blanks around pasted text.
 std::string trimmed(const std::string& text) {
     const std::size_t begin = text.find_first_not_of(" \t\r\n");
     if (begin == std::string::npos) return {};
@@ -57,7 +57,7 @@ SearchForm formIn(const Query& query) {
     return form;
 }
 
-/// The form's fields as the parameters of GET /v1/records and GET /v1/events are written.
+/// The form's fields as parameters of GET /v1/records and GET /v1/events.
 Query parametersOf(const SearchForm& form, const Query& query) {
     Query parameters{{"environment", std::string(toString(form.environment))}};
     if (!form.text.empty()) parameters.emplace(form.by, form.text);
@@ -103,7 +103,7 @@ std::optional<FoundRecord> recordNamed(RecordStore& store, const std::string& na
     RecordSearch search;
     search.environment = environment;
     search.name = name;
-    search.limit = 1;  // the shortest name comes first
+    search.limit = 1;  // the shortest name is first
     RecordPage page = store.search(search);
     if (page.records.empty() || page.records.front().record.name != name) return std::nullopt;
     return std::move(page.records.front());

@@ -1,6 +1,6 @@
 // The page for people (page.h) on the administration listener.
 //
-//   GET /                   the search form, and how much there is
+//   GET /                   the search form, and the number of records and events
 //   GET /records            a page of records: by, text, environment, after
 //   GET /records/NAME       a record and a page of its history: environment, after
 //   GET /style.css

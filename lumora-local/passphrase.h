@@ -1,7 +1,7 @@
-// What opens encrypted key files.
+// The passphrase for encrypted key files.
 //
 // A passphrase is the first line of a file. "credential:NAME" means the file NAME in $CREDENTIALS_DIRECTORY,
-// where systemd puts what LoadCredential= and LoadCredentialEncrypted= name.
+// where systemd puts the credentials of LoadCredential= and LoadCredentialEncrypted=.
 #pragma once
 
 #include <array>
@@ -13,7 +13,7 @@ namespace pinwell::lumora {
 
 inline constexpr std::size_t kMaximumPassphraseLength = 1024;
 
-/// A text that is wiped when it goes.
+/// A text that the destructor wipes.
 class Passphrase {
   public:
     Passphrase() = default;
@@ -21,7 +21,7 @@ class Passphrase {
     Passphrase(const Passphrase&) = delete;
     Passphrase& operator=(const Passphrase&) = delete;
 
-    /// Reads it from `place`, a path or "credential:NAME", in the place of what was there. Throws Failure:
+    /// Reads it from `place`, a path or "credential:NAME", and replaces the earlier text. Throws Failure:
     /// EX_NOINPUT if the file cannot be read, EX_CONFIG if its first line is empty or too long.
     void read(const std::string& place);
 

@@ -1,5 +1,5 @@
-// Artefacts as the tool itself sees them, so that the service can never name a record differently than the
-// tool looks it up.
+// Reads artefacts with the tool's own code, so the service and the tool always use the same name for a
+// record.
 #pragma once
 
 #include <memory>
@@ -8,7 +8,7 @@
 
 namespace pinwell::lumora {
 
-/// Silences the tool's message functions for the whole process: what they would say is said by the Failure.
+/// Silences the tool's message functions for the whole process: the Failure has their text.
 std::unique_ptr<ArtefactHasher> makePinwellArtefactHasher();
 
 }  // namespace pinwell::lumora

@@ -19,8 +19,8 @@ using Clock = std::chrono::steady_clock;
 
 constexpr int kBinary = 1;
 
-// A session's own bounds, in milliseconds; the client's deadlines are shorter as a rule. A commit that the
-// server may lose in a crash is no commit here.
+// A session's own bounds, in milliseconds; the client's deadlines are usually shorter. A commit must survive
+// a crash of the server.
 constexpr const char* kSessionSettings = R"(
     SET search_path = lumora, pg_temp;
     SET statement_timeout = 30000;
@@ -36,7 +36,7 @@ std::string firstLine(std::string_view text) {
 }
 
 /// The server ended the session, or is not ready for one: class 08, its shutdown, its start. After a
-/// changeover the old primary refuses to write (25006); another server may not.
+/// switchover the old primary refuses to write (25006); another server may not.
 bool meansLost(std::string_view state) {
     constexpr std::array<std::string_view, 5> kStates{"57P01", "57P02", "57P03", "57P05", "25006"};
     return state.starts_with("08") || std::find(kStates.begin(), kStates.end(), state) != kStates.end();
@@ -106,8 +106,8 @@ PostgresConnection::PostgresConnection(const std::string& url, Deadline deadline
 PostgresConnection::~PostgresConnection() = default;
 
 void PostgresConnection::connect(const std::string& url, const std::string& user, Deadline deadline) {
-    // What comes before "dbname" can be set otherwise in the URL; what comes after it cannot. A keyword
-    // without a value is as if it were absent.
+    // The URL can override the keywords before "dbname", but not the ones after it. A keyword without a value
+    // counts as absent.
     constexpr std::array<const char*, 10> kKeywords{"fallback_application_name",
                                                     "user",
                                                     "gssencmode",
@@ -156,7 +156,7 @@ void PostgresConnection::flush(Deadline deadline) {
         const int left = PQflush(connection_.get());
         if (left == 0) return;
         if (left < 0) lose(firstLine(PQerrorMessage(connection_.get())));
-        // The server may have to be read before it reads on.
+        // The server may have to send before it reads on.
         waitFor(POLLIN | POLLOUT, deadline);
         if (PQconsumeInput(connection_.get()) == 0) lose(firstLine(PQerrorMessage(connection_.get())));
     }

@@ -33,7 +33,7 @@ class PostgresError : public std::runtime_error {
     /// SQLSTATE, five characters; empty if the failure is not the server's.
     const std::string& state() const noexcept { return state_; }
 
-    /// True if the connection is of no further use. Another one may do what this one could not.
+    /// True if the connection is no longer usable. Another connection may succeed.
     bool lost() const noexcept { return lost_; }
 
   private:
@@ -63,7 +63,7 @@ class PostgresParameter {
     bool binary_ = false;
 };
 
-/// The rows of an answer, in PostgreSQL's binary format.
+/// The rows of a result, in PostgreSQL's binary format.
 class PostgresRows {
   public:
     explicit PostgresRows(pg_result* result);
@@ -85,10 +85,10 @@ class PostgresRows {
 /// Is used by one thread at a time. Each call throws PostgresError.
 class PostgresConnection {
   public:
-    /// Connects to what the URL (or the text of keywords) names. Each session has UTF-8 as its encoding, the
-    /// schema `lumora` as its search path, commits that are on the server's disk before it says so, and a
-    /// bound on statements and locks. `user` is who connects if neither the URL nor the environment says so;
-    /// empty: the library asks the system for the caller's name.
+    /// Connects to the database of the URL (or of the text of keywords). Each session has UTF-8 as its
+    /// encoding, the schema `lumora` as its search path, commits that return after the server's disk has
+    /// them, and a bound on statements and locks. `user` is the user if neither the URL nor the environment
+    /// names one; if empty, the library uses the caller's login name.
     PostgresConnection(const std::string& url, Deadline deadline, const std::string& user = {});
     ~PostgresConnection();
     PostgresConnection(const PostgresConnection&) = delete;
@@ -108,7 +108,7 @@ class PostgresConnection {
     /// False after a failure that leaves the connection without use.
     bool usable() const noexcept { return usable_; }
 
-    /// What the server said beforehand: "in_hot_standby", "server_encoding".
+    /// A setting that the server reports: "in_hot_standby", "server_encoding".
     std::string setting(const char* name) const;
 
   private:

@@ -25,7 +25,7 @@ void addTo(std::map<std::string, std::string>& values, const Options& options) {
     }
 }
 
-/// Of a list with commas: one that is a name or an address, and not the directory of a socket.
+/// Whether a list with commas has a name or an address, not only directories of sockets.
 bool namesAHost(const std::string& list) {
     for (std::size_t begin = 0; begin <= list.size();) {
         const std::size_t end = std::min(list.find(',', begin), list.size());
@@ -42,7 +42,7 @@ PostgresNeeds postgresNeeds(const std::string& url, const std::string& named) {
     const Options given(PQconninfoParse(url.c_str(), &error));
     const std::unique_ptr<char, Free> text(error);
     if (given == nullptr) {
-        // The library's text may repeat a part of the URL, and a password with it.
+        // The library's text may repeat a part of the URL, with a password in it.
         throw Failure(EX_CONFIG, foundation::format("%@: the URL of the database cannot be read", named));
     }
     std::map<std::string, std::string> values;

@@ -1,4 +1,4 @@
-// What connections to a database need beside the network, by its URL and by the environment variables of
+// The needs of connections to a database beside the network, by its URL and by the environment variables of
 // libpq.
 #pragma once
 
@@ -12,10 +12,10 @@ struct PostgresNeeds {
     std::vector<std::string> files;  // passwords, certificates, keys; not all of them need to exist
 };
 
-/// Throws Failure (EX_CONFIG) if the URL cannot be read; `named` says where it is from.
+/// Throws Failure (EX_CONFIG) if the URL cannot be parsed; `named` is its source.
 PostgresNeeds postgresNeeds(const std::string& url, const std::string& named);
 
-/// Who connects if the URL does not say so: $PGUSER, or the caller's login name. Empty if that is not known.
+/// The user if the URL names none: $PGUSER, or the caller's login name. Empty if unknown.
 std::string defaultPostgresUser();
 
 }  // namespace pinwell::lumora

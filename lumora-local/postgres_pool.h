@@ -13,7 +13,7 @@ namespace pinwell::lumora {
 
 class PostgresPool {
   public:
-    /// A connection on loan. It goes back at the end, unless it has become useless.
+    /// A connection on loan. The destructor returns it, unless it has become unusable.
     class Lease {
       public:
         Lease(PostgresPool& pool, std::unique_ptr<PostgresConnection> connection)
@@ -36,18 +36,18 @@ class PostgresPool {
         bool discarded_ = false;
     };
 
-    /// Opens no connection yet. Finds out who the caller is: a process that has given up its rights no longer
-    /// can.
+    /// Opens no connection yet. Determines the caller's name now, because a process cannot do so after giving
+    /// up its rights.
     PostgresPool(std::string url, std::size_t maximum);
 
-    /// Waits for a free connection until the deadline, or opens one, which takes five seconds at most. A
-    /// server that let an attempt wait is not tried again for as long. Throws PostgresError.
+    /// Waits for a free connection until the deadline, or opens one, which takes five seconds at most. After
+    /// a timeout, it does not try that server again for the same time. Throws PostgresError.
     Lease take(Deadline deadline);
 
-    /// Closes the connections that nobody uses: after one of them turned out to be broken, all may be.
+    /// Closes the idle connections: if one turns out to be broken, all may be.
     void closeIdle();
 
-    /// How many connections were made so far.
+    /// The number of connections made so far.
     std::uint64_t opened() const;
 
   private:

@@ -12,7 +12,7 @@ namespace {
 
 using foundation::ByteView;
 
-// Memory of a batch: this, twice for the hexadecimal form of bytes, and what libpq copies.
+// The memory of a batch is this, twice for the hexadecimal form of bytes, and libpq's copy.
 constexpr std::size_t kBatchVolume = 2 * 1024 * 1024;
 
 constexpr const char* kInsertRecords =

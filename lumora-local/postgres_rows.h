@@ -19,8 +19,8 @@ std::string nameOf(Environment environment);
 /// one.
 Event readEvent(const PostgresRows& rows, std::size_t row);
 
-/// Columns of a record `r`; the last one holds all its hashes: of each its algorithm (8 bytes), its length
-/// (4 bytes), both big-endian, and its bytes.
+/// Columns of a record `r`. The last one has all its hashes: for each the algorithm (8 bytes) and the length
+/// (4 bytes), both big-endian, and the bytes.
 inline constexpr const char* kPostgresRecordColumns =
     "r.name, r.label, r.revoked, r.signed_at, r.asset IS NOT NULL,"
     " (SELECT string_agg(int8send(h.algorithm) || int4send(length(h.hash)) || h.hash, '' ORDER BY h.position)"
@@ -29,7 +29,7 @@ inline constexpr const char* kPostgresRecordColumns =
 /// Of the columns above. Throws Failure (EX_CONFIG) for hashes that do not have this form.
 Record readRecord(const PostgresRows& rows, std::size_t row);
 
-/// The same columns, the last one with the first 101 hashes alone.
+/// The same columns, but the last one has only the first 101 hashes.
 inline constexpr const char* kPostgresFoundRecordColumns =
     "r.name, r.label, r.revoked, r.signed_at, r.asset IS NOT NULL,"
     " (SELECT string_agg(int8send(h.algorithm) || int4send(length(h.hash)) || h.hash, '' ORDER BY h.position)"
@@ -37,12 +37,12 @@ inline constexpr const char* kPostgresFoundRecordColumns =
     "        ORDER BY position LIMIT 101) h)";
 static_assert(kHashesInSearch + 1 == 101);
 
-/// What became of the occasion's request when it was carried out before; `nullopt` if it was not, or the
+/// The outcome of the occasion's request if it was carried out before; `nullopt` if it was not, or if the
 /// occasion has none. Throws ReusedKeyFailure.
 std::optional<PutOutcome> findRequest(PostgresConnection& connection, const Occasion& occasion,
                                       Deadline deadline);
 
-/// Keeps the occasion's request, if it has one, and removes some of those that have been kept long enough.
+/// Stores the occasion's request, if it has one, and removes some expired ones.
 void keepRequest(PostgresConnection& connection, const Occasion& occasion, const Event& event,
                  foundation::ByteView ticket, Deadline deadline);
 
@@ -75,7 +75,7 @@ class PostgresBatch {
     /// Worth a round trip to the server.
     bool isFull() const noexcept;
 
-    /// Writes what was added, within the caller's transaction, and forgets it. Throws PostgresError.
+    /// Writes the added rows within the caller's transaction, and empties the batch. Throws PostgresError.
     void write(PostgresConnection& connection, Deadline deadline);
 
   private:
@@ -85,7 +85,7 @@ class PostgresBatch {
     std::size_t volume_ = 0;
 };
 
-/// What a record's name is made of: printable ASCII. No other text names a record of this store.
+/// Whether the text is printable ASCII. No other text names a record of this store.
 bool canNameARecord(std::string_view name);
 
 }  // namespace pinwell::lumora

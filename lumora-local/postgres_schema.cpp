@@ -6,7 +6,7 @@
 namespace pinwell::lumora {
 namespace {
 
-// Makes the upgrades of several instances take turns. Nothing else in the database should use this number.
+// Instances upgrade one after another under this lock. Nothing else in the database should use this number.
 constexpr const char* kTakeTurns = "SELECT pg_advisory_xact_lock(7526467402843185714)";
 
 constexpr const char* kVersionTable = R"(
@@ -19,7 +19,7 @@ constexpr const char* kVersionTable = R"(
     INSERT INTO lumora.store (version, records) SELECT 0, 0 WHERE NOT EXISTS (SELECT 1 FROM lumora.store);
 )";
 
-// Tickets are mostly signatures, which no compression makes smaller.
+// Tickets are mostly signatures, which cannot be compressed.
 constexpr const char* kRecordsAndEvents = R"(
     CREATE TABLE record (
         environment text COLLATE "C" NOT NULL,

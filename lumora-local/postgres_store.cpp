@@ -21,7 +21,7 @@ using Clock = std::chrono::steady_clock;
 constexpr std::chrono::seconds kReadingTime{5};
 constexpr std::chrono::seconds kChangingTime{20};
 constexpr std::chrono::seconds kUpgradeTime{600};
-constexpr milliseconds kSilence{120'000};  // between two rows of a walk; the first may have to be sorted
+constexpr milliseconds kSilence{120'000};  // between two rows of a walk; the first may need sorting
 constexpr milliseconds kPauseBeforeTryingAgain{100};
 
 constexpr const char* kLockStore = "SELECT version FROM store FOR UPDATE";
@@ -34,7 +34,7 @@ int exitStatusFor(const PostgresError& error) {
     const std::string& state = error.state();
     if (error.lost() || state.starts_with("53") || state.starts_with("40") || state == "55P03" ||
         state == "57014") {
-        return EX_TEMPFAIL;  // gone, out of a resource, in another transaction's way, too slow
+        return EX_TEMPFAIL;  // lost, out of a resource, blocked by another transaction, too slow
     }
     if (state == "42501") return EX_NOPERM;
     if (state.starts_with("22") || state.starts_with("23")) return EX_DATAERR;
@@ -50,7 +50,7 @@ Failure cannotUse(const PostgresPlace& place, std::string_view why) {
     return {EX_CONFIG, format("%@: %@", place.named, why)};
 }
 
-/// Holds the store's lock from here to the end of the caller's transaction.
+/// Locks the store until the end of the caller's transaction.
 void lockStore(PostgresConnection& connection, Deadline deadline) {
     const PostgresRows rows = connection.query(kLockStore, {}, deadline);
     const std::int64_t version = rows.size() == 1 ? rows.integer(0, 0) : 0;
@@ -101,7 +101,7 @@ std::optional<RevokedElsewhere> revokedBeside(PostgresConnection& connection, En
     return RevokedElsewhere{parseEnvironment(rows.text(0, 0)).value_or(environment), rows.text(0, 1)};
 }
 
-/// Of the columns `asset, length(ticket), ticket`, from `column` on; the last may be NULL for an asset.
+/// From the columns `asset, length(ticket), ticket`, starting at `column`; the last may be NULL for an asset.
 Delivery readDelivery(const PostgresRows& rows, std::size_t row, int column) {
     Delivery delivery;
     if (rows.isNull(row, column)) {
@@ -161,7 +161,7 @@ void PostgresStore::create(const PostgresPlace& place,
         PostgresConnection connection(place.url, Clock::now() + kReadingTime);
         checkServer(connection, place);
         if (postgresVersion(connection, soon()).value_or(0) > kPostgresVersion) {
-            bringForward(connection, place);  // says so
+            bringForward(connection, place);  // reports it
         }
         connection.execute(kBeginChange, soon());
         connection.execute(
@@ -218,8 +218,8 @@ PostgresStore::PostgresStore(PostgresPlace place, StoreGuard guard)
 
 PostgresStore::~PostgresStore() = default;
 
-/// Runs work that changes nothing. A connection that was idle may have been lost long ago: then once more,
-/// on a new one.
+/// Runs work that changes nothing. An idle connection may have been lost long ago: in this case it tries once
+/// more, on a new one.
 template <class Work>
 auto PostgresStore::reading(Work work) {
     if (guard_) guard_(StoreUse::reading);
@@ -268,7 +268,7 @@ PostgresPool::Lease PostgresStore::beginWalk() {
 std::optional<Delivery> PostgresStore::findTicket(Environment environment, const std::string& recordName) {
     if (!canNameARecord(recordName)) return std::nullopt;
     return reading([&](PostgresConnection& connection, Deadline deadline) -> std::optional<Delivery> {
-        // An asset's bytes are left where they are: the answer needs their number alone.
+        // The asset's bytes are not read: the response needs only their number.
         const PostgresRows rows = connection.query(
             "SELECT asset, length(ticket), CASE WHEN asset IS NULL THEN ticket END"
             " FROM record WHERE environment = $1 AND name = $2",
@@ -320,9 +320,9 @@ std::size_t PostgresStore::countRecords() {
     });
 }
 
-/// Runs work within a transaction that has the store's lock, again if the connection is lost. By the
-/// outcome's event it is known whether a commit without an answer took place. What the work changed is on the
-/// server's disk when this returns.
+/// Runs work within a transaction that has the store's lock, and repeats it if the connection is lost. The
+/// outcome's event shows whether a commit without a response took place. When this returns, the changes are
+/// on the server's disk.
 PutOutcome PostgresStore::changing(const std::function<PutOutcome(PostgresConnection&, Deadline)>& work) {
     const Deadline deadline = Clock::now() + kChangingTime;
     for (;;) {
@@ -333,12 +333,12 @@ PutOutcome PostgresStore::changing(const std::function<PutOutcome(PostgresConnec
             lockStore(*lease, deadline);
             if (guard_) guard_(StoreUse::changing);
             PutOutcome outcome = work(*lease, deadline);
-            // From here on the server decides alone: a statement's time limit would cut short its wait for a
-            // replica that is to have the change too.
+            // From here on only the server decides: a time limit would interrupt its wait for a replica that
+            // must also have the change.
             lease->execute("SET LOCAL statement_timeout = 0", deadline);
             if (commit(lease, deadline) || wasCommitted(outcome.event.hash, deadline)) return outcome;
         } catch (const PostgresError& error) {
-            // Nothing was committed: the transaction did not come so far.
+            // Nothing was committed: the transaction failed before the commit.
             const bool another = error.lost() || error.state().starts_with("40");
             if (!another || Clock::now() + kPauseBeforeTryingAgain >= deadline) throw asFailure(error);
             pool_.closeIdle();
@@ -347,7 +347,7 @@ PutOutcome PostgresStore::changing(const std::function<PutOutcome(PostgresConnec
     }
 }
 
-/// Returns false if the connection was lost: what became of the transaction is not known then.
+/// Returns false if the connection was lost: the outcome of the transaction is then unknown.
 bool PostgresStore::commit(PostgresPool::Lease& lease, Deadline deadline) {
     try {
         lease->execute("COMMIT", deadline);
@@ -427,7 +427,7 @@ bool PostgresStore::wasCommitted(const std::string& eventHash, Deadline deadline
             auto connection = pool_.take(deadline);
             connection.discard();
             connection->execute(kBeginChange, deadline);
-            // Who has the lock knows that the earlier transaction is over.
+            // With the lock, the earlier transaction is known to be over.
             lockStore(*connection, deadline);
             return connection->query("SELECT 1 FROM event WHERE hash = $1", {eventHash}, deadline).size() > 0;
         } catch (const PostgresError& error) {

@@ -1,8 +1,8 @@
 // A record store in a PostgreSQL database, which several services share.
 //
-// A database that goes away costs the calls that need it, and nothing else: each call finds a connection
-// anew, and fails with EX_TEMPFAIL after a bounded time. put() returns only if the server has the change on
-// its disk; if a connection is lost during the commit, the store asks the next one what became of it.
+// A lost database affects only the calls that need it: each call makes a new connection, and fails with
+// EX_TEMPFAIL after a bounded time. put() returns only after the server has the change on its disk. If a
+// connection is lost during the commit, the store queries the outcome over the next one.
 #pragma once
 
 #include <functional>
@@ -17,15 +17,15 @@ namespace pinwell::lumora {
 struct PostgresPlace {
     std::string url;              // "postgresql://...", as libpq reads it
     std::string named;            // for messages: the file and the key that name it
-    bool forLookups = false;      // the server may be a replica that cannot be written
+    bool forLookups = false;      // the server may be a read-only replica
     std::size_t connections = 8;  // at most
 };
 
 class PostgresStore final : public RecordStore {
   public:
-    /// Makes a store in a database that has none, and fills it with what `pour` hands over, in one
-    /// transaction. Throws Failure: EX_CONFIG if the database cannot be used, EX_CANTCREAT if it has records
-    /// or events already.
+    /// Makes a store in a database without one, and fills it with the output of `pour`, in one transaction.
+    /// Throws Failure: EX_CONFIG if the database is unusable, EX_CANTCREAT if it has records or events
+    /// already.
     static void create(const PostgresPlace& place,
                        const std::function<void(const ContentsVisitor&)>& pour = {});
 

@@ -48,7 +48,7 @@ Answer problem(int status, std::string_view detail) {
     Answer answer;
     answer.status = status;
     answer.contentType = "application/problem+json";
-    // What a client sent may be repeated in the detail: without control characters, and in UTF-8.
+    // The detail may repeat the client's text: without control characters, and in UTF-8.
     const auto document =
         foundation::serializeJSON(Dictionary{{"type", "about:blank"},
                                              {"title", titleOf(status)},

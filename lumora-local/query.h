@@ -11,11 +11,11 @@ namespace pinwell::lumora {
 /// Names and values, decoded: "%" and two hexadecimal digits is a byte, "+" is a space (as forms are sent).
 using Query = std::map<std::string, std::string, std::less<>>;
 
-/// What is after the first "?" of the target; a "#" ends it. `nullopt` if it is malformed: a name that is
-/// empty or comes twice, a "%" without its digits, a byte 0, text that is not UTF-8.
+/// The text after the first "?" of the target, up to a "#". `nullopt` if it is malformed: a name that is
+/// empty or occurs twice, a "%" without its digits, a byte 0, text that is not UTF-8.
 std::optional<Query> parseQuery(std::string_view target);
 
-/// Text in the place of a value, or of a segment of a path: every byte but letters, digits and "-._~" is
+/// Text in the form of a value, or of a segment of a path: every byte except letters, digits and "-._~" is
 /// encoded.
 std::string percentEncoded(std::string_view text);
 

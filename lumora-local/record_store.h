@@ -1,4 +1,4 @@
-// The records of a service and the log of what was done to them. One interface; a database behind it.
+// The records of a service and the log of their changes: one interface, with a database behind it.
 //
 // Several processes use a store at once: some serve from it while others issue and revoke.
 #pragma once
@@ -29,16 +29,16 @@ struct Delivery {
     std::optional<Asset> asset;
 };
 
-/// What answering a lookup needs. Calls may come from any thread, several at a time. They throw when the
-/// records cannot be read.
+/// The part of a store that lookups need. Calls may come from any thread, several at a time. They throw if
+/// the records cannot be read.
 class RecordSource {
   public:
     virtual ~RecordSource() = default;
 
     virtual std::optional<Delivery> findTicket(Environment environment, const std::string& recordName) = 0;
 
-    /// For each name what findTicket() finds, in their order. All of it is in memory at once, so whoever asks
-    /// bounds the number of names.
+    /// The result of findTicket() for each name, in their order. All results are in memory at once, so the
+    /// caller bounds the number of names.
     virtual std::vector<std::optional<Delivery>> findTickets(Environment environment,
                                                              std::span<const std::string> recordNames) {
         std::vector<std::optional<Delivery>> found;
@@ -46,30 +46,30 @@ class RecordSource {
         return found;
     }
 
-    /// The ticket behind an asset identifier. A record that is replaced takes its asset along, so a revoked
-    /// record's earlier ticket is no longer delivered.
+    /// The ticket of an asset identifier. Replacing a record removes its asset, so a revoked record's earlier
+    /// ticket is no longer delivered.
     virtual std::optional<foundation::Data> findAsset(const std::string& identifier) = 0;
 
     virtual std::size_t countRecords() = 0;
 
-    /// Grows with every change of a record, whoever makes it: what was read after a call is not older than
-    /// the state that the result stands for. A change that was acknowledged before the call is part of it.
-    /// `nullopt` if the source cannot tell, and then nothing that was read may be used again.
+    /// Grows with every change of a record, by any process. A read after this call returns this state or a
+    /// newer one. A change that was acknowledged before the call is part of it. `nullopt` if the source does
+    /// not know; then no earlier read may be used again.
     virtual std::optional<std::uint64_t> changeCounter() { return std::nullopt; }
 };
 
-/// What a store tells of itself, for metrics.
+/// Facts about a store, for metrics.
 struct StoreFacts {
     std::uint64_t records = 0;
     std::uint64_t events = 0;
     std::optional<std::uint64_t> connectionsMade;  // to a database, since the store was opened
 };
 
-/// One record with all that is known of it except the ticket.
+/// One record with all its data except the ticket.
 struct Record {
     std::string name;
-    std::string label;             // what was issued, for people: the artefact's file name
-    std::vector<CodeHash> hashes;  // what the ticket lists, the artefact's own hash first
+    std::string label;             // for people: the artefact's file name
+    std::vector<CodeHash> hashes;  // the ticket's hashes, the artefact's own first
     bool revoked = false;
     bool asAsset = false;
     foundation::Date signedAt;
@@ -80,26 +80,26 @@ struct SignedRecord {
     foundation::Data ticket;
 };
 
-/// The request by which a change comes, so that the store knows its repetition. Each is kept for
-/// kRequestLife, counted from the occasion's time.
+/// Identifies the request of a change, so that the store recognises a repetition. It is stored for
+/// kRequestLife, from the occasion's time.
 struct RequestIdentity {
     std::string client;
-    std::string key;     // by which the client knows the request; of that client alone
-    std::string digest;  // of all that the request asks for: text that another request does not have
+    std::string key;     // the client's key for the request; unique only for that client
+    std::string digest;  // of the whole request: different for another request
 };
 inline constexpr std::int64_t kRequestLife = 24 * 60 * 60;  // seconds
 
-/// Who changes records, when and why. Becomes part of each event.
+/// Actor, time and reason of a change. Becomes part of each event.
 struct Occasion {
     foundation::Date time;
     std::string actor;
     std::optional<Reason> reason;  // of a revocation
     std::string comment;
-    bool reinstates = false;  // a valid ticket may take the place of a revoked one
+    bool reinstates = false;  // a valid ticket may replace a revoked one
     std::optional<RequestIdentity> request{};
 };
 
-/// What became of a put.
+/// The result of a put.
 struct PutOutcome {
     Event event;                              // about the first record
     std::optional<foundation::Data> earlier;  // its ticket, if the same request was carried out before
@@ -124,7 +124,7 @@ class ReusedKeyFailure : public Failure {
     ReusedKeyFailure() : Failure(EX_DATAERR, "the key of the request belongs to another request") {}
 };
 
-/// An attempt to change a record that was refused before it came to the store.
+/// A refused attempt to change a record, which did not reach the store.
 struct RefusedAttempt {
     Environment environment = Environment::production;
     std::string record;  // empty if the attempt named none
@@ -136,7 +136,7 @@ struct RecordState {
     std::string name;
     std::string ticket;  // SHA-256 of the ticket in hexadecimal
     bool revoked = false;
-    std::optional<std::string> lastTicket;  // what the last event says; `nullopt` if there is no event
+    std::optional<std::string> lastTicket;  // according to the last event; `nullopt` if there is none
     std::optional<Action> lastAction;
 };
 
@@ -153,11 +153,11 @@ struct ContentsVisitor {
     std::function<void(Environment, const SignedRecord&)> record;
 };
 
-/// What a store is about to do.
+/// The next operation of a store.
 enum class StoreUse { reading, changing };
 
-/// Is asked before each reading, and within each transaction that changes records, when no other writer can
-/// come in between. It throws Failure to forbid it. From any thread.
+/// Called before each reading, and within each transaction that changes records, when no other writer can
+/// intervene. Throws Failure to forbid the operation. From any thread.
 using StoreGuard = std::function<void(StoreUse)>;
 
 struct EventQuery {
@@ -165,10 +165,10 @@ struct EventQuery {
     std::optional<foundation::Date> since;  // events of this second and later
 };
 
-/// How much of a label a search compares: bytes from its beginning.
+/// The compared part of a label in a search: bytes from its beginning.
 inline constexpr std::size_t kSearchedLabelBytes = 64;
 
-/// How many of a record's hashes a search returns at most.
+/// The highest number of a record's hashes in a search.
 inline constexpr std::size_t kHashesInSearch = 100;
 
 /// After which record a page begins: by the searched bytes of its label in a search by label, and by its
@@ -183,9 +183,9 @@ struct RecordCursor {
 /// searched bytes, then of names; any other in the order of names.
 struct RecordSearch {
     Environment environment = Environment::production;
-    std::optional<std::string> name;       // how it begins; printable ASCII
-    std::optional<std::string> label;      // how it begins; not empty, at most kSearchedLabelBytes bytes
-    std::optional<foundation::Data> hash;  // that the ticket lists, whatever its digest type
+    std::optional<std::string> name;       // its beginning; printable ASCII
+    std::optional<std::string> label;      // its beginning; not empty, at most kSearchedLabelBytes bytes
+    std::optional<foundation::Data> hash;  // in the ticket, of any digest type
     std::size_t limit = 0;
     std::optional<RecordCursor> after;
 };
@@ -216,7 +216,7 @@ struct EventSearch {
     std::optional<EventCursor> after;
 };
 
-/// A page may have fewer events than the limit and still a next one.
+/// A page may have fewer events than the limit even if there is a next page.
 struct EventPage {
     std::vector<Event> events;
     std::optional<EventCursor> next;
@@ -233,20 +233,20 @@ class RecordStore : public RecordSource {
     /// When this returns, the change survives a crash.
     ///
     /// If the occasion's request was carried out before, nothing changes, and the outcome is that of the
-    /// first time; if its key belongs to another request: ReusedKeyFailure. `records` has one record then.
+    /// first time. Throws ReusedKeyFailure if its key belongs to another request. Needs one record.
     virtual PutOutcome put(Environment environment, const std::vector<SignedRecord>& records,
                            const Occasion& occasion) = 0;
 
     /// Appends an event `refused`, which changes no record.
     virtual void noteRefusal(const RefusedAttempt& attempt, const Occasion& occasion) = 0;
 
-    /// One page of the records that fit. What a call reads and holds does not grow with the store.
+    /// One page of the matching records. The work and memory of a call do not grow with the store.
     virtual RecordPage search(const RecordSearch& search) = 0;
 
-    /// One page of the events that fit. What a call reads and holds does not grow with the store.
+    /// One page of the matching events. The work and memory of a call do not grow with the store.
     virtual EventPage search(const EventSearch& search) = 0;
 
-    /// Costs the same however much the store holds.
+    /// Costs the same for every size of the store.
     virtual StoreFacts facts() = 0;
 
     virtual std::optional<Record> find(Environment environment, const std::string& recordName) = 0;
@@ -263,11 +263,11 @@ class RecordStore : public RecordSource {
     /// The hash of the last event; hashBeforeTheFirstEvent() if there is none.
     virtual std::string headHash() = 0;
 
-    /// All that the store holds, as of one point in time. Memory does not grow with it.
+    /// The whole contents of the store at one point in time. Memory does not grow with them.
     virtual void walkContents(const ContentsVisitor& visitor) = 0;
 
-    /// Runs `work`, which may read this store, while nobody can change it. `work` gets a function that throws
-    /// if that has ceased to be so.
+    /// Runs `work`, which may read this store, while nobody can change it. The argument of `work` is a
+    /// function that throws if this is no longer certain.
     virtual void holdStill(const std::function<void(const std::function<void()>& confirm)>& work) = 0;
 };
 

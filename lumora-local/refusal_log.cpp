@@ -44,7 +44,7 @@ void RefusalLog::note(const std::string& client, const RefusedAttempt& attempt,
         try {
             errorLog_(format("cannot note a refused attempt of %@: %s", client, error.what()));
         } catch (const std::exception&) {
-            return;  // nobody is left to tell
+            return;  // there is no one left to report to
         }
     }
 }

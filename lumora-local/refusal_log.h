@@ -1,8 +1,8 @@
 // Refused attempts to issue and revoke, as events of the log.
 //
-// Events stay for good, so their number is bounded: each client may cause twenty at once and one a minute,
-// all clients together a hundred at once and one every ten seconds. What is over is counted, and the next
-// event's comment says how many there were. The access log has a line for every request.
+// Events are kept for ever, so their number is bounded: each client may cause twenty at once and one a
+// minute, all clients together a hundred at once and one every ten seconds. Further refusals are counted, and
+// the next event's comment has their number. The access log has a line for every request.
 #pragma once
 
 #include <cstdint>
@@ -17,7 +17,7 @@
 
 namespace pinwell::lumora {
 
-/// May be used from any thread.
+/// For any thread.
 class RefusalLog {
   public:
     using ErrorLog = std::function<void(std::string_view)>;
@@ -25,7 +25,7 @@ class RefusalLog {
     /// `store` must outlive it. `errorLog` hears of events that cannot be written.
     RefusalLog(RecordStore& store, ErrorLog errorLog, TokenBuckets::Now now = TokenBuckets::Clock::now);
 
-    /// Never throws: the refusal stands whether it can be noted or not.
+    /// Never throws: the request is refused even if the refusal cannot be logged.
     void note(const std::string& client, const RefusedAttempt& attempt, const std::string& why) noexcept;
 
   private:

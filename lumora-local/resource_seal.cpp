@@ -18,8 +18,8 @@ Dictionary ruleOf(double weight, const char* flag = nullptr) {
     return rule;
 }
 
-/// Everything is sealed: as code where code is, but for the property list, which has a slot of its own, and
-/// what desktops leave behind.
+/// Everything is sealed, and nested code as code. Exceptions: the property list, which has its own slot, and
+/// files of the desktop.
 Dictionary rules2() {
     return {
         {"^.*", true},

@@ -1,7 +1,7 @@
-// The seal of a bundle's resources, as signers write it: Contents/_CodeSignature/CodeResources.
+// The seal of a bundle's resources, in the form of code signers: Contents/_CodeSignature/CodeResources.
 //
-// A property list of four dictionaries: `files2` says of each path what it holds, `rules2` which paths are to
-// be sealed at all; `files` and `rules` say the same to readers that know SHA-1 and plain files alone.
+// A property list of four dictionaries: `files2` has the contents of each path, `rules2` determines the
+// sealed paths. `files` and `rules` are the same for readers that know only SHA-1 and plain files.
 #pragma once
 
 #include <string>
@@ -18,13 +18,13 @@ class ResourceSeal {
   public:
     void addFile(const std::string& path, foundation::ByteView contents);
 
-    /// One that may be missing, as localized resources may.
+    /// A file that may be missing, such as localized resources.
     void addOptionalFile(const std::string& path, foundation::ByteView contents);
 
     void addLink(const std::string& path, const std::string& target);
 
-    /// Nested code, a file or a bundle: any of these code hashes, of which the first is the one that readers
-    /// look at.
+    /// Nested code, a file or a bundle: with any of these code hashes. Readers use the first
+    /// one.
     void addNestedCode(const std::string& path, const std::vector<foundation::Data>& codeHashes);
 
     foundation::Data document() const;

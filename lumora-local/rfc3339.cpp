@@ -24,7 +24,7 @@ class Scanner {
     bool failed() const noexcept { return failed_; }
     bool atEnd() const noexcept { return rest_.empty(); }
 
-    /// Exactly `digits` decimal digits that make a number of at most `maximum`.
+    /// Exactly `digits` decimal digits, with a value of at most `maximum`.
     int number(std::size_t digits, int maximum) {
         int value = 0;
         for (std::size_t i = 0; i < digits; ++i) value = value * 10 + digit();

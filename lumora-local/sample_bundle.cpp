@@ -40,7 +40,7 @@ constexpr std::uint32_t kMainCommandSize = 24;
 constexpr std::uint32_t kSignatureCommandSize = 16;
 constexpr std::uint32_t kCommandsSize =
     2 * kSegmentCommandSize + kSectionSize + kMainCommandSize + kSignatureCommandSize;
-constexpr std::uint32_t kInstructions = 0x80000400;  // section flags: code, and nothing else
+constexpr std::uint32_t kInstructions = 0x80000400;  // section flags: only code
 constexpr unsigned kAlignmentBits = 14;
 constexpr std::uint32_t kAlignment = 1U << kAlignmentBits;
 constexpr std::uint64_t kLoadAddress = 0x100000000;
@@ -81,7 +81,7 @@ void appendSegment(ByteWriter& image, const Segment& segment) {
         .le32(0);
 }
 
-/// Header, commands and code: what the page hashes cover.
+/// Header, commands and code: the bytes under the page hashes.
 Data textSegment(std::uint32_t cpuType, std::uint32_t signatureSize) {
     const Data code = program(cpuType);
     const std::uint32_t codeOffset = kImageHeaderSize + kCommandsSize;
@@ -168,7 +168,7 @@ namespace {
 /// A universal image of a slice for each processor.
 struct Program {
     Data image;
-    std::vector<Data> codeHashes;  // that of the slice which stands for all first
+    std::vector<Data> codeHashes;  // the first is the hash of the slice that identifies the code
 };
 
 Program makeProgram(const std::string& identifier, const SealedComponents& components) {
@@ -186,7 +186,7 @@ Data information(const std::string& name, const std::string& identifier, const c
                                  {"CFBundleVersion", "1"}});
 }
 
-/// Writes the framework, and has the seal of what it is in name it.
+/// Writes the framework, and adds it to the seal of its bundle.
 void writeFramework(const std::string& frameworks, ResourceSeal& outer) {
     const std::string name(kFramework);
     const std::string identifier = std::string(kBundleIdentifier) + ".greeting";

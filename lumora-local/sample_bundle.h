@@ -3,9 +3,9 @@
 //   Info.plist
 //   Programs/Sample                 the executable; any one directory in Contents would do
 //   Programs/sample-tool            a nested program
-//   Frameworks/Greeting.framework   a nested framework of one version, with links, a seal and resources of
-//   its own Resources/ReadMe.txt Resources/Latest.txt            a link to it Resources/en.lproj/Greeting.txt
-//   may be missing _CodeSignature/CodeResources    the seal of all that (resource_seal.h)
+//   Frameworks/Greeting.framework   a nested framework of one version, with links, a seal and resources
+//   Resources/                      ReadMe.txt; Latest.txt, a link to it; en.lproj/Greeting.txt (optional)
+//   _CodeSignature/CodeResources    the seal of all these (resource_seal.h)
 //
 // The executables are universal images of two slices, each signed ad hoc (ad_hoc_signature.h).
 #pragma once
@@ -32,10 +32,10 @@ struct SealedComponents {
 foundation::Data makeSignedImage(std::uint32_t cpuType, const std::string& identifier,
                                  const SealedComponents& components);
 
-/// Slices behind a universal header (magic CAFEBABE), each at a multiple of 16 KiB.
+/// Slices after a universal header (magic CAFEBABE), each at a multiple of 16 KiB.
 foundation::Data makeUniversalImage(const std::vector<std::pair<std::uint32_t, foundation::Data>>& slices);
 
-/// Writes `directory`/Sample.app and answers its path. Nothing that exists is overwritten. Throws Failure.
+/// Writes `directory`/Sample.app and returns its path. Overwrites nothing. Throws Failure.
 std::string writeSampleApplication(const std::string& directory);
 
 }  // namespace pinwell::lumora

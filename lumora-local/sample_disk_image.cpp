@@ -100,7 +100,7 @@ struct Trailer {
     std::uint32_t dataChecksum = 0;
     std::uint32_t masterChecksum = 0;
 
-    /// With nothing in its two code-signature fields unless a signature of that length stands before it.
+    /// The two code-signature fields are empty unless a signature of that length is before it.
     Data bytes(std::size_t signatureLength) const {
         const std::size_t end = dataLength + propertyListLength;
         ByteWriter trailer;

@@ -1,4 +1,4 @@
-// Disk images to try the service with, which other readers of the format take as well.
+// Disk images to try the service with, which other readers of the format accept too.
 //
 // | Part           | Holds                                                                            |
 // |----------------|----------------------------------------------------------------------------------|
@@ -35,7 +35,7 @@ enum class ImageSignature { none, adHoc };
 /// A whole image, always the same.
 foundation::Data makeDiskImage(ImageSignature signature);
 
-/// Writes `directory`/`name` and answers its path. Nothing that exists is overwritten. Throws Failure.
+/// Writes `directory`/`name` and returns its path. Overwrites nothing. Throws Failure.
 std::string writeSampleDiskImage(const std::string& directory, const std::string& name,
                                  ImageSignature signature);
 

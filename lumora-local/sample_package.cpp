@@ -34,13 +34,13 @@ constexpr std::string_view kReadMe = "A sample package, to try a record service 
 
 using MessageHandle = foundation::Handle<CMS_ContentInfo, CMS_ContentInfo_free>;
 
-// It is certificates that the stack owns, not itself alone.
+// The stack owns its certificates too.
 struct FreeStack {
     void operator()(STACK_OF(X509) * stack) const noexcept { sk_X509_pop_free(stack, X509_free); }
 };
 using CertificateStack = std::unique_ptr<STACK_OF(X509), FreeStack>;
 
-/// What the table says that the heap holds beyond checksum and signature.
+/// A file in the heap after checksum and signature, according to the table.
 struct ArchivedFile {
     std::string_view name;
     std::string_view contents;

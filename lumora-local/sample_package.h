@@ -1,4 +1,4 @@
-// A signed flat package to try the service with, which other readers of xar archives take as well.
+// A signed flat package to try the service with, which other readers of xar archives accept too.
 //
 // | Part              | Holds                                                                         |
 // |-------------------|-------------------------------------------------------------------------------|
@@ -7,8 +7,8 @@
 // |                   | certificates, the files                                                       |
 // | heap              | SHA-1 of the stream; CMS SignedData, detached over that; the files' data      |
 //
-// The files are PackageInfo, compressed, and ReadMe.txt, as it is. The signer's key and certificates (RSA
-// 2048; a root and a leaf) are made for the occasion and forgotten, so no two packages are the same.
+// The files are PackageInfo, compressed, and ReadMe.txt, uncompressed. The signer's key and certificates (RSA
+// 2048; a root and a leaf) are made new and not kept, so no two packages are the same.
 #pragma once
 
 #include <string>
@@ -21,7 +21,7 @@ namespace pinwell::lumora {
 /// A whole package, signed at `now`. Throws Failure when the cryptographic library fails.
 foundation::Data makePackage(foundation::Date now);
 
-/// Writes `directory`/`name` and answers its path. Nothing that exists is overwritten. Throws Failure.
+/// Writes `directory`/`name` and returns its path. Overwrites nothing. Throws Failure.
 std::string writeSamplePackage(const std::string& directory, const std::string& name, foundation::Date now);
 
 }  // namespace pinwell::lumora

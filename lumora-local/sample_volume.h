@@ -1,4 +1,4 @@
-// A small FAT12 file system (ECMA-107) with one text file, for the sample disk images to hold.
+// A small FAT12 file system (ECMA-107) with one text file, for the sample disk images.
 //
 // | Sector  | Holds                                                     |
 // |---------|-----------------------------------------------------------|
@@ -18,7 +18,7 @@ namespace pinwell::lumora {
 inline constexpr std::size_t kSectorSize = 512;
 inline constexpr std::size_t kVolumeSectors = 256;
 
-/// The whole volume, the same for the same text, of which there is one sector at most.
+/// The whole volume, the same for the same text. The text has one sector at most.
 foundation::Data makeSampleVolume(std::string_view text);
 
 }  // namespace pinwell::lumora

@@ -19,8 +19,8 @@ constexpr const char* kSignedImage = "Sample.dmg";
 constexpr const char* kUnsignedImage = "Unsigned.dmg";
 constexpr const char* kPackage = "Sample.pkg";
 
-/// What has been written of the set, which is removed again unless it is complete: half a set would be in the
-/// way of the next try.
+/// The written files of the set. They are removed again unless the set is complete, so that the next try
+/// finds no file.
 class PendingSet {
   public:
     PendingSet() = default;

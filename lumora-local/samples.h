@@ -1,4 +1,4 @@
-// The sample artefacts, one of every kind that carries a ticket.
+// The sample artefacts, one of every kind that can have a ticket.
 #pragma once
 
 #include <string>
@@ -8,7 +8,7 @@
 
 namespace pinwell::lumora {
 
-/// Writes these into `directory`, which is made when it does not exist, and answers their paths in this
+/// Writes these into `directory`, which is made if it is missing, and returns their paths in this
 /// order:
 ///
 ///   Sample.app     an application (sample_bundle.h)
@@ -16,8 +16,8 @@ namespace pinwell::lumora {
 ///   Unsigned.dmg   the same image without one
 ///   Sample.pkg     a signed flat package (sample_package.h), signed at `now`
 ///
-/// Nothing that exists is overwritten. When one of them exists or cannot be written, none is there afterwards
-/// that was not there before. Throws Failure.
+/// Overwrites nothing. If one of them exists or cannot be written, no new file remains. Throws
+/// Failure.
 std::vector<std::string> writeSamples(const std::string& directory, foundation::Date now);
 
 }  // namespace pinwell::lumora

@@ -1,4 +1,4 @@
-// What the searches of both stores have in common.
+// Shared code of the searches of both stores.
 #pragma once
 
 #include <string>
@@ -7,17 +7,17 @@
 
 namespace pinwell::lumora {
 
-/// How many events of one record a search with `since` reads for one page.
+/// The number of one record's events that a search with `since` reads for one page.
 inline constexpr std::size_t kEventsReadForAPage = 1000;
 
-/// The first text, byte by byte, after all that begin with `prefix`. Empty if there is none: the prefix is
-/// empty, or has bytes of the value 255 alone.
+/// The first text, byte by byte, after all texts that begin with `prefix`. Empty if there is none: the prefix
+/// is empty, or has only bytes of the value 255.
 std::string endOfPrefix(std::string prefix);
 
-/// Where a page lies. No name of a record is empty, and each is printable ASCII.
+/// The range of a page. No name of a record is empty, and each is printable ASCII.
 struct SearchRange {
     std::string firstName;   // at it; after it, in a search by label
-    std::string endName;     // before it; has no meaning in other searches than those by name
+    std::string endName;     // before it; meaningful only in searches by name
     std::string firstLabel;  // with the first name of this label, in a search by label
     std::string endLabel;    // before it
 };
@@ -33,15 +33,15 @@ RecordPage makePage(std::vector<FoundRecord> records, std::size_t limit, bool by
 /// Leaves out the hashes over the bound; `record` was read with one more at most.
 FoundRecord cutHashes(Record record);
 
-/// Collects the events of a page: those that fit of all that are read, in their order.
+/// Collects the events of a page: the matching ones of all that are read, in their order.
 class EventPageMaker {
   public:
     explicit EventPageMaker(const EventSearch& search) : search_(search) {}
 
-    /// How many rows to read at most: one more than the page needs.
+    /// The highest number of rows to read: one more than the page needs.
     std::size_t rows() const noexcept;
 
-    /// Whether time is a condition that the database has not looked at.
+    /// Whether time is a condition that the database has not checked.
     bool filtersTime() const noexcept { return search_.record && search_.since; }
 
     /// Takes the next row. Returns false if the page is full.

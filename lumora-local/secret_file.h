@@ -1,4 +1,4 @@
-// Reading keys and passphrases (foundation/secret_file.h), with Failure in the place of errors.
+// Reading keys and passphrases (foundation/secret_file.h), with Failure instead of error values.
 #pragma once
 
 #include <cstddef>

@@ -32,14 +32,14 @@ using foundation::format;
 
 constexpr std::size_t kAdminConnections = 512;
 
-/// Where a client finds a service that listens at `bound`: an address that stands for all is none to connect
-/// to.
+/// The endpoint at which a client reaches a service that listens at `bound`: nobody can connect to the
+/// address of all interfaces.
 Endpoint reachable(const ServiceDirectory& directory, const Endpoint& bound) {
     return isWildcard(bound.host) ? Endpoint{directory.hosts().front(), bound.port} : bound;
 }
 
-/// Lines about the service in the form that service.json asks for. As JSON all of them go where requests go:
-/// standard error has the program's name before each line.
+/// Lines about the service in the form of service.json. JSON lines all go to the output of the requests,
+/// because standard error has the program's name before each line.
 ServeOutput inForm(LogForm form, const ServeOutput& output) {
     if (form == LogForm::text) return {output.out, output.err, output.out};
     const auto as = [out = output.out](const char* level) {
@@ -49,7 +49,7 @@ ServeOutput inForm(LogForm form, const ServeOutput& output) {
     return {as("info"), as("error"), output.out};
 }
 
-/// Whoever issues or revokes needs room for it.
+/// Issuing and revoking need free space.
 Obstacle fullDiskAt(const std::string& path) {
     return [path]() -> std::optional<std::string> {
         constexpr std::uint64_t kLeast = std::uint64_t{1024} * 1024;
@@ -60,7 +60,7 @@ Obstacle fullDiskAt(const std::string& path) {
     };
 }
 
-/// Announces readiness to the service manager, and gives the signs of life that it wants.
+/// Reports readiness to the service manager, and sends the notifications that it expects.
 class ManagedRun {
   public:
     explicit ManagedRun(const ServiceManager& manager) : manager_(manager) {
@@ -71,7 +71,7 @@ class ManagedRun {
         manager_.tell(format("READY=1\nSTATUS=Answers lookups at https://%@", toString(endpoint)));
     }
 
-    /// From one of the threads that answer requests: when all of them are stuck, the sign does not come.
+    /// Runs on a thread that serves requests: if all of them are stuck, no notification is sent.
     std::optional<Watch> watch() const {
         if (!ticker_) return std::nullopt;
         return Watch{ticker_.get(), [this] {
@@ -130,7 +130,7 @@ foundation::FileDescriptor waitForSignals(std::initializer_list<int> numbers) {
     return descriptor;
 }
 
-/// Takes the signals that have come.
+/// Takes the received signals.
 void takeSignals(int descriptor) {
     signalfd_siginfo information{};
     while (::read(descriptor, &information, sizeof information) == sizeof information) continue;
@@ -141,7 +141,7 @@ TlsFiles tlsFilesOf(const ServiceDirectory& directory) {
             directory.settings().passphraseFile};
 }
 
-/// What the metrics are made of. Its functions may be called from any thread.
+/// The sources of the metrics. Its functions may be called from any thread.
 class MetricsSource {
   public:
     MetricsSource(const ServiceDirectory& directory, const std::string& version, RecordStore& store)
@@ -149,7 +149,7 @@ class MetricsSource {
 
     ServiceCounts& counts() noexcept { return counts_; }
 
-    /// A file that has gone out of reach keeps the date that is known of it.
+    /// A file that has become unreadable keeps its known date.
     void readCertificatesAgain(const ServiceDirectory& directory) {
         std::vector<CertificateDate> dates = certificateDates(directory);
         const std::lock_guard lock(mutex_);
@@ -166,7 +166,7 @@ class MetricsSource {
         try {
             facts.store = store_.facts();
         } catch (const std::exception&) {
-            // The metrics say that the records cannot be read.
+            // The metrics report that the records cannot be read.
         }
         {
             const std::lock_guard lock(mutex_);
@@ -184,10 +184,10 @@ class MetricsSource {
     std::vector<CertificateDate> certificates_;
 };
 
-/// From the files that service.json names now, which may be others than before.
+/// Reads the files that service.json names now, which may be different ones.
 void reload(const std::string& path, TlsContext& tls, MetricsSource& metrics, AdminListener* admin,
             const ServeOutput& output) {
-    if (admin != nullptr) admin->reloadAccess();  // whatever becomes of the rest
+    if (admin != nullptr) admin->reloadAccess();  // even if the rest fails
     try {
         const ServiceDirectory directory = ServiceDirectory::open(path);
         if (admin != nullptr) admin->reload(directory);
@@ -199,7 +199,7 @@ void reload(const std::string& path, TlsContext& tls, MetricsSource& metrics, Ad
     }
 }
 
-/// As many descriptors as the system lets this process have, and how many of them may be connections.
+/// Raises the limit of descriptors to the system's maximum. Returns how many of them may be connections.
 std::size_t connectionsThatFit() {
     constexpr rlim_t kForEverythingElse = 64;
     rlimit limit{};
@@ -212,8 +212,7 @@ std::size_t connectionsThatFit() {
     return std::min<std::size_t>(ServerLimits{}.connections, fitting);
 }
 
-/// Before a byte of a client is read. Certificate and key may be links that whoever renews them points
-/// elsewhere.
+/// Runs before a byte of a client is read. Certificate and key may be links, which a renewal may change.
 void giveUpRights(const ServiceDirectory& directory, const AdminListener* admin, const ServeOutput& output) {
     sandbox::Confinement rights;
     rights.files = sandbox::libraryFiles();
@@ -237,7 +236,7 @@ ServeSignals catchServeSignals() {
 void serve(const ServiceDirectory& directory, const ServeOptions& options, const ServeOutput& lines,
            const ServeSignals& signals) {
     const ServeOutput output = inForm(directory.settings().log, lines);
-    // A file that an earlier run left would tell of a service that is not there yet.
+    // A file of an earlier run would announce a service that does not listen yet.
     if (options.readyFile) ::unlink(options.readyFile->c_str());
     if (options.metricsListen) requireMetrics();
     // First, for a key in a token needs a process that has no second thread and no connection yet.

@@ -1,4 +1,4 @@
-// Running the service: where it listens, whom it tells, and how it is stopped.
+// Running the service: its listeners, its reports, and its end.
 #pragma once
 
 #include <functional>
@@ -12,7 +12,7 @@
 
 namespace pinwell::lumora {
 
-/// Where clients with certificates are served, and whose certificates they have.
+/// The listener for clients with certificates, and the authorities of these.
 struct AdminOptions {
     Endpoint listen;
     std::string clientAuthorities;  // a PEM file
@@ -21,17 +21,17 @@ struct AdminOptions {
 struct ServeOptions {
     std::string version;                    // of the program, for its metrics
     std::optional<Endpoint> metricsListen;  // no metrics, when absent
-    std::optional<AdminOptions> admin;      // what service.json says, when absent
-    std::optional<Endpoint> listen;         // where platform.json sends clients, when absent
+    std::optional<AdminOptions> admin;      // if absent, service.json decides
+    std::optional<Endpoint> listen;         // if absent, the host in platform.json
     std::optional<std::string>
         readyFile;                // gets one line, "https://ADDRESS:PORT", once connections are accepted
-    bool updatePlatform = false;  // platform.json is rewritten to where the service really is
+    bool updatePlatform = false;  // writes the service's real place into platform.json
 };
 
 /// Takes whole lines, without a newline; from any thread, several at a time.
 struct ServeOutput {
     std::function<void(std::string_view)> out;         // readiness and the access log
-    std::function<void(std::string_view)> err;         // what went wrong, or will
+    std::function<void(std::string_view)> err;         // for errors and warnings
     std::function<void(std::string_view)> requests{};  // the access log, in its form already
 };
 
@@ -45,8 +45,8 @@ struct ServeSignals {
 /// other thread exists. Throws Failure.
 ServeSignals catchServeSignals();
 
-/// Serves until it is asked to stop; SIGHUP makes it read certificates, keys and access.toml again. Throws
-/// Failure when it cannot begin.
+/// Serves until a signal ends it; on SIGHUP it reads certificates, keys and access.toml again. Throws Failure
+/// if it cannot begin.
 void serve(const ServiceDirectory& directory, const ServeOptions& options, const ServeOutput& output,
            const ServeSignals& signals);
 

@@ -133,7 +133,7 @@ std::size_t workersFor(const ServerLimits& limits) {
     return std::max<std::size_t>(kFewest, std::thread::hardware_concurrency());
 }
 
-/// Runs handlers until there is nothing left to do. What a handler throws ends that handler alone.
+/// Runs handlers until there are no more. An exception of a handler ends only that handler.
 void work(asio::io_context& context, const Server::LogLine& errorLog) {
     for (;;) {
         try {

@@ -17,7 +17,7 @@ namespace pinwell::lumora {
 struct ServerLimits {
     std::size_t workers = 0;                  // threads; 0: one for each processor, and at least four
     std::size_t connections = 16 * 1024;      // accepted and not yet closed; more wait in the kernel's queue
-    std::size_t connectionsPerAddress = 256;  // beyond it, the peer's oldest silent connection makes room
+    std::size_t connectionsPerAddress = 256;  // beyond it, the peer's oldest silent connection is closed
     std::size_t requestsPerConnection = 1000;
     std::size_t headBytes = 64 * 1024;  // request line and headers, over all of them
     std::chrono::milliseconds handshakeTime{10'000};
@@ -25,10 +25,10 @@ struct ServerLimits {
     std::chrono::milliseconds requestTime{30'000};
 };
 
-/// Something to do while serving, whenever a descriptor becomes readable.
+/// An action while serving, whenever a descriptor becomes readable.
 struct Watch {
     int descriptor = -1;
-    std::function<void()> react;  // reads what is there; from any worker, one call at a time
+    std::function<void()> react;  // reads the descriptor; from any worker, one call at a time
 };
 
 class Server {
@@ -36,14 +36,14 @@ class Server {
     using LogLine = std::function<void(std::string_view)>;
 
     /// References must outlive the server. `accessLog` gets one line per request, `errorLog` one for each
-    /// request that failed through our own fault; both come from any worker, several at a time. What
-    /// happens is counted in `counts`, if it is there.
+    /// request that failed through a fault of the service. Both calls come from any worker, several at a
+    /// time. `counts`, if present, counts the events.
     Server(const HttpService& service, const TlsContext& context, LogLine accessLog, LogLine errorLog,
            const ServerLimits& limits = {}, LogForm form = LogForm::text, ServiceCounts* counts = nullptr);
 
-    /// Serves until `stopDescriptor` is readable (which nobody may undo), then refuses new connections, lets
-    /// the requests that have begun finish, closes the silent connections, and returns. Takes the listener's
-    /// socket.
+    /// Serves until `stopDescriptor` is readable (and must then stay readable). Then it refuses new
+    /// connections, lets the running requests finish, closes the silent connections, and returns. Takes the
+    /// listener's socket.
     void run(Listener& listener, int stopDescriptor, const std::vector<Watch>& watches = {});
 
   private:

@@ -1,7 +1,7 @@
-// What a running service counts, for its metrics.
+// The counts of a running service, for its metrics.
 //
-// The number of counters is fixed: nothing that a client chooses makes another one. Counting costs an atomic
-// addition or a few, and no lock.
+// The number of counters is fixed: no input of a client makes a new one. Counting costs a few atomic
+// additions, and no lock.
 #pragma once
 
 #include <array>
@@ -18,17 +18,17 @@ inline constexpr std::array kRequestKindNames{"lookup",         "asset", "health
                                               "administration", "other", "unreadable"};
 inline constexpr std::size_t kRequestKinds = kRequestKindNames.size();
 
-/// Statuses that are counted each by itself; all others are counted together.
+/// Statuses with their own count; all others are counted together.
 inline constexpr std::array kCountedStatuses{200, 201, 400, 401, 403, 404, 405, 408, 409,
                                              411, 413, 414, 415, 422, 429, 431, 500, 503};
 inline constexpr std::size_t kOtherStatus = kCountedStatuses.size();
 
-/// Upper bounds of the time that answers take, in microseconds. Slower ones are counted beyond the last.
+/// Upper bounds of a response's time, in microseconds. Slower responses are counted beyond the last.
 inline constexpr std::array<std::uint64_t, 15> kDurationBounds{
     100,    250,     500,     1'000,   2'500,     5'000,     10'000,    25'000,
     50'000, 100'000, 250'000, 500'000, 1'000'000, 2'500'000, 10'000'000};
 
-/// May be used from any thread.
+/// For any thread.
 class ServiceCounts {
   public:
     template <class Number>
@@ -42,14 +42,14 @@ class ServiceCounts {
     template <class Number>
     struct Numbers {
         std::array<Requests<Number>, kRequestKinds> requests{};
-        Number recordsKnown{};       // records in answers
-        Number recordsUnknown{};     // names in answers that no record has
-        Number recordsFromMemory{};  // of the known ones, those for which the store was not asked
+        Number recordsKnown{};       // records in responses
+        Number recordsUnknown{};     // names in responses without a record
+        Number recordsFromMemory{};  // of the known ones, those read without the store
         Number connectionsAccepted{};
         Number connectionsClosed{};
-        Number connectionsRefused{};  // of peers that had too many
+        Number connectionsRefused{};  // of peers with too many
         Number handshakesFailed{};
-        Number storeFailures{};  // requests that failed for want of the records
+        Number storeFailures{};  // requests that failed because of the store
     };
     using Snapshot = Numbers<std::uint64_t>;
 

@@ -85,7 +85,7 @@ void buildPlatform(const std::string& directory, const Authority& authority, con
     flushDirectory(directory);
 }
 
-/// The file may be read from other places than this one.
+/// The file may be read from another working directory.
 std::string absolutePlace(const std::string& place) {
     return place.empty() || isCredential(place) ? place : std::filesystem::absolute(place).string();
 }
@@ -119,7 +119,8 @@ void buildService(const std::string& directory, const Authority& authority, cons
     flushDirectory(directory);
 }
 
-/// What init makes beside the service's directory. Removed again if the service cannot be made.
+/// The files that init makes beside the service's directory. They are removed again if the service cannot be
+/// made.
 class Surroundings {
   public:
     Surroundings(const NewService& service, const Authority& authority) : service_(service) {
@@ -129,7 +130,7 @@ class Surroundings {
         flushDirectory(root_->path());
     }
 
-    /// Writes the signer's request, whose key goes into `directory`, and puts all in its place.
+    /// Writes the signer's request, whose key goes into `directory`, and moves all files to their places.
     void publish(const std::string& directory, std::string_view passphrase) {
         if (!service_.signerRequest.empty()) {
             const Identity signer = requestSigner(passphrase);

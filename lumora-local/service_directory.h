@@ -1,14 +1,14 @@
-// Where a record service lives.
+// The directory of a record service.
 //
 //   DIR/platform/platform.json   {"lumora": {"host": "HOST:PORT"}}
-//   DIR/platform/roots/          the service's root certificate: with the line above, all that a client needs
+//   DIR/platform/roots/          the service's root certificate: with the line above, all that clients need
 //   DIR/service/                 mode 0700
-//       service.json             what the owner decides (service_settings.h)
+//       service.json             the owner's settings (service_settings.h)
 //       root.pem  ticket-intermediate.pem  ticket-signer.pem  server.pem
 //       root.key  ticket-intermediate.key  ticket-signer.key  server.key      mode 0600
-//                                root.key may be elsewhere; service.json may name others in the place of
+//                                root.key may be elsewhere; service.json may name other files than
 //                                ticket-signer.* and server.*
-//       records.sqlite           the records (and the files that SQLite keeps beside it)
+//       records.sqlite           the records (and SQLite's own files beside it)
 #pragma once
 
 #include <cstdint>
@@ -27,18 +27,18 @@ namespace pinwell::lumora {
 
 struct NewService {
     std::vector<std::string> hosts;     // canonical; empty: the three names of this machine's loopback
-    std::uint16_t port = kDefaultPort;  // where clients will look for it, on the first host
-    std::string passphraseFile{};       // passphrase.h; empty: keys are kept in the clear
+    std::uint16_t port = kDefaultPort;  // for clients, on the first host
+    std::string passphraseFile{};       // passphrase.h; empty: keys are unencrypted
     std::string rootDirectory{};  // made for root.pem and root.key; empty: root.key stays in the service
     std::string signerRequest{};  // made: a request (RFC 2986) for the signer's certificate; empty: the
                                   // service's own authority certifies the signer
 };
 
-/// An existing service's place. Immutable; may be used from any thread.
+/// The directory of an existing service. Immutable; for any thread.
 class ServiceDirectory {
   public:
     /// Makes everything that the table above lists, with fresh keys and an empty store, or nothing at all.
-    /// `path` may be an empty directory; anything else that stands there is left alone (EX_CANTCREAT).
+    /// `path` may be an empty directory; any other existing file stays unchanged (EX_CANTCREAT).
     static ServiceDirectory create(const std::string& path, const NewService& service, foundation::Date now);
 
     /// Reads the description. Throws Failure (EX_NOINPUT) when there is no service at `path`, (EX_CONFIG)
@@ -61,7 +61,7 @@ class ServiceDirectory {
     /// Of the ticket signer's chain, the signer first and the root last.
     const std::vector<std::string>& signerChainPaths() const noexcept { return settings_.signer.chain; }
 
-    /// Canonical, as they stand in the server's certificate; never empty.
+    /// Canonical, as in the server's certificate; never empty.
     const std::vector<std::string>& hosts() const noexcept { return settings_.hosts; }
 
     /// Opens the key and the chain that service.json names now. Throws Failure: EX_CONFIG if they do not fit,
@@ -69,7 +69,7 @@ class ServiceDirectory {
     TicketSigner openSigner() const;
 
     /// Rewrites service.json in one step, as `change` edits it; one process at a time. The new document is
-    /// held to the rules before it replaces the old one. Throws Failure.
+    /// checked before it replaces the old one. Throws Failure.
     void changeSettings(const std::function<void(foundation::Dictionary&)>& change) const;
 
     /// URL of the database with the records; `nullopt` if they are in the file at storePath().
@@ -77,15 +77,15 @@ class ServiceDirectory {
 
     Role role() const noexcept { return settings_.role; }
 
-    /// Rewrites service.json in one step, so that the records are at `url`; the rest of its text stays as it
-    /// is in meaning. The old file stays beside it. Returns the path of the old file. Throws Failure.
+    /// Rewrites service.json in one step, so that the records are at `url`; its other members keep their
+    /// values. The old file remains beside it. Returns the path of the old file. Throws Failure.
     std::string moveStore(const std::string& url) const;
 
-    /// Where platform.json sends clients. Read afresh each time. Throws Failure (EX_CONFIG) when it says
-    /// nothing that can be used.
+    /// The host that platform.json names for clients. Reads the file each time. Throws Failure (EX_CONFIG)
+    /// if the file names no usable host.
     Endpoint advertisedEndpoint() const;
 
-    /// Rewrites platform.json in one step; what else stands in it stays. Throws Failure.
+    /// Rewrites platform.json in one step; its other members stay. Throws Failure.
     void advertise(const Endpoint& endpoint) const;
 
   private:

@@ -1,7 +1,7 @@
-// What the service manager is told: sd_notify(3), one small datagram each.
+// Reports to the service manager: sd_notify(3), one small datagram each.
 //
-// The protocol is documented and stable, and this is all of it that a service needs; the library for it would
-// be the larger part of what is loaded.
+// The protocol is documented and stable, and this is the whole part that a service needs. Its library would
+// be the larger part of the loaded code.
 #pragma once
 
 #include <chrono>
@@ -12,19 +12,19 @@
 
 namespace pinwell::lumora {
 
-/// May be used from any thread.
+/// For any thread.
 class ServiceManager {
   public:
-    /// Takes the manager's address from $NOTIFY_SOCKET. Without it, with one that is no such address, and
-    /// after the manager has gone, nobody is told anything. To be made before the process gives up its
+    /// Takes the manager's address from $NOTIFY_SOCKET. Without it, with an invalid address, and
+    /// after the manager has gone, it sends nothing. Make it before the process gives up its
     /// rights.
     ServiceManager();
 
     /// Variables of sd_notify(3), one a line: "READY=1".
     void tell(std::string_view state) const noexcept;
 
-    /// How often the manager wants a sign of life, halved; `nullopt` if it wants none ($WATCHDOG_USEC,
-    /// $WATCHDOG_PID).
+    /// Half of the interval at which the manager expects a notification; `nullopt` if it expects none
+    /// ($WATCHDOG_USEC, $WATCHDOG_PID).
     std::optional<std::chrono::microseconds> signOfLife() const noexcept { return signOfLife_; }
 
   private:

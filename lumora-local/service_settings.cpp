@@ -20,7 +20,7 @@ using foundation::Value;
 
 constexpr std::size_t kCertificatesInChain = 3;
 
-/// One object of the document. Its name is what stands before its keys in messages: "signer.".
+/// One object of the document. Its name comes before its keys in messages: "signer.".
 class SettingsObject {
   public:
     SettingsObject(const Value& value, const std::string& path, std::string name)
@@ -160,7 +160,7 @@ Role readRole(const SettingsObject& settings, const Value& role, const std::stri
 
 void requireStoreUrl(const std::string& url, const std::string& place) {
     const bool known = url.starts_with("postgresql://") || url.starts_with("postgres://");
-    // The text is not repeated: it may hold a password.
+    // The text is not repeated: it may contain a password.
     if (!known || url.find('\0') != std::string::npos) {
         throw Failure(EX_CONFIG, format("%@ is not a URL that begins with postgresql://", place));
     }

@@ -1,20 +1,20 @@
-// service.json: what a service's owner decides. docs/service/service.schema.json describes it for programs.
+// service.json: the owner's settings of a service. Its JSON schema is docs/service/service.schema.json.
 //
-//   "hosts"           the names that the server's certificate speaks for; required
+//   "hosts"           the names in the server's certificate; required
 //   "passphraseFile"  a file whose first line opens encrypted key files, or "credential:NAME", the file NAME
 //                     in $CREDENTIALS_DIRECTORY
 //   "log"             "text", or "json": one object a line
 //   "store"           "postgresql://...", if the records are not in records.sqlite
 //   "role"            "lookup", for a service that changes no records
-//   "signer"          whose signature tickets bear: {"key": K, "chain": [SIGNER, INTERMEDIATE, ROOT]}. K is a
+//   "signer"          the key that signs tickets: {"key": K, "chain": [SIGNER, INTERMEDIATE, ROOT]}. K is a
 //                     file or a URI "pkcs11:..."; the others are certificates. "requested" is a key that
 //                     waits for its certificate.
-//   "admin"           {"listen": "ADDRESS:PORT", "clients": FILE}: where clients with certificates issue and
-//                     revoke, and the certificates of the authorities that they have theirs from
-//   "server"          {"key": FILE, "certificate": FILE}, what TLS clients see
+//   "admin"           {"listen": "ADDRESS:PORT", "clients": FILE}: the listener for clients with
+//                     certificates, and the certificates of these clients' authorities
+//   "server"          {"key": FILE, "certificate": FILE}, for TLS clients
 //
-// Files are relative to the folder of service.json. Without "signer" and "server" they have the names that
-// `init` gives. A key that is not known is refused: it may be a mistyped one.
+// Files are relative to the folder of service.json. Without "signer" and "server" they have the names
+// that `init` gives. An unknown key is refused: it may be mistyped.
 #pragma once
 
 #include <optional>
@@ -27,7 +27,7 @@
 
 namespace pinwell::lumora {
 
-/// How a URI begins that names a key in a token (RFC 7512).
+/// The beginning of a URI that names a key in a token (RFC 7512).
 inline constexpr std::string_view kTokenScheme = "pkcs11:";
 
 bool isTokenKey(std::string_view key);
@@ -37,20 +37,20 @@ enum class Role {
     lookup,  ///< answers lookups
 };
 
-/// Throws Failure (EX_CONFIG) if `url` is not one of a database that can hold records. `place` is where it is
-/// from, for the message.
+/// Throws Failure (EX_CONFIG) if `url` is not a URL of a database for records. `place` is its source, for the
+/// message.
 void requireStoreUrl(const std::string& url, const std::string& place);
 
 struct SignerSettings {
-    std::string key;  // a path or a pkcs11: URI; empty as long as nothing is certified
+    std::string key;  // a path or a pkcs11: URI; empty as long as no certificate exists
     std::vector<std::string>
-        chain;              // paths: signer, intermediate, root; empty as long as nothing is certified
+        chain;              // paths: signer, intermediate, root; empty as long as no certificate exists
     std::string requested;  // as `key`; empty unless a certificate was requested
 };
 
 struct ServerSettings {
     std::string key;          // a path
-    std::string certificate;  // a path; the file may hold further certificates of the chain
+    std::string certificate;  // a path; further certificates of the chain may follow in the file
 };
 
 struct AdminSettings {

@@ -1,5 +1,5 @@
-// What readers of tickets demand of a signer's three certificates. Includes OpenSSL's headers: for .cpp files
-// of this folder.
+// The conditions of ticket readers on a signer's three certificates. Includes OpenSSL's headers: for .cpp
+// files of this folder.
 #pragma once
 
 #include <optional>
@@ -10,11 +10,11 @@
 
 namespace pinwell::lumora {
 
-/// What is wrong with the chain signer, intermediate, root; `nullopt` if a ticket with it is accepted by
-/// those who trust the root. Dates play no part, as they play none for tickets.
+/// The fault of the chain signer, intermediate, root; `nullopt` if clients that trust the root accept its
+/// tickets. Dates do not count, as for tickets.
 std::optional<std::string> faultOfSignerChain(const std::vector<CertificateHandle>& chain);
 
-/// What is wrong with `certificate` as one that `issuer` has issued; `nullopt` if nothing is.
+/// The fault of `certificate` as a certificate issued by `issuer`; `nullopt` if it has none.
 std::optional<std::string> faultOfIssue(X509* certificate, X509* issuer);
 
 bool carriesMarker(X509* certificate, std::string_view oid);

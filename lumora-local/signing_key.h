@@ -1,8 +1,8 @@
-// The private key that signs tickets: in a file, or in a token that does not let it out.
+// The private key that signs tickets: in a file, or in a token that never releases it.
 //
-// A token is spoken to by a process of its own, which is started before this one gives up its rights and
-// reads an artefact. So whatever a token's library opens, loads or connects to is out of reach of what an
-// artefact may bring about, and this process never has the key, nor the token's PIN.
+// Only a separate process uses a token. It starts before this process gives up its rights and reads an
+// artefact. So a hostile artefact cannot reach the files, code and connections of a token's library. This
+// process never has the key or the token's PIN.
 #pragma once
 
 #include <memory>
@@ -12,7 +12,7 @@
 
 namespace pinwell::lumora {
 
-/// An EC key on P-256. May be used from any thread.
+/// An EC key on P-256. For any thread.
 class SigningKey {
   public:
     virtual ~SigningKey() = default;

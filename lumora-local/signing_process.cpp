@@ -27,9 +27,9 @@ using foundation::Data;
 using foundation::FileDescriptor;
 using OpenKey = std::function<std::unique_ptr<DigestSigner>()>;
 
-// A question is the digest to sign. An answer is one byte, an exit status, two bytes, the length of what
-// follows, lowest first, and that many bytes: a signature or the text of a failure. The child begins with an
-// answer, the public key.
+// A question is the digest to sign. An answer is one byte, an exit status; two bytes, the length of the rest,
+// lowest first; and that many bytes, a signature or the text of a failure. The child first sends an answer
+// with the public key.
 constexpr std::size_t kDigestSize = 32;
 constexpr std::size_t kAnswerHead = 3;
 constexpr std::size_t kMaximumAnswer = 4096;
@@ -53,7 +53,7 @@ bool readFully(int descriptor, std::byte* room, std::size_t size) {
 
 bool writeFully(int descriptor, ByteView bytes) {
     while (!bytes.empty()) {
-        // A peer that has gone is an error here, whatever the process does about SIGPIPE.
+        // A lost peer is an error here, even if the process does not ignore SIGPIPE.
         const ssize_t count = ::send(descriptor, bytes.data(), bytes.size(), MSG_NOSIGNAL);
         if (count < 0 && errno == EINTR) continue;
         if (count <= 0) return false;
@@ -141,7 +141,7 @@ class KeyBehindProcess final : public SigningKey {
         throw Failure(EX_IOERR, "the process that speaks to the token has ended, or does not answer");
     }
 
-    /// An answer that comes too late is never taken for the next one: nothing is asked after it.
+    /// A late answer is never mistaken for the next one: no question follows it.
     [[noreturn]] void giveUp() const {
         ours_.reset();
         failTalking();

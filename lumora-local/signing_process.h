@@ -1,4 +1,4 @@
-// The process that speaks to a token, seen from the one that makes tickets.
+// The process that uses a token, from the side of the process that makes tickets.
 #pragma once
 
 #include <chrono>

@@ -1,4 +1,4 @@
-// The protocol of a TCP socket, as Asio has to be told it. For the .cpp files of this folder.
+// The protocol of a TCP socket, in Asio's form. For the .cpp files of this folder.
 #pragma once
 
 #include <sys/socket.h>

@@ -38,13 +38,13 @@ int exitStatusOfSqlite(int code) noexcept {
         case SQLITE_FORMAT:
         case SQLITE_CONSTRAINT:
         case SQLITE_MISMATCH:
-        case SQLITE_ERROR:  // our own statements fail so where a file lacks a table or a column of ours
+        case SQLITE_ERROR:  // our own statements fail so if a file lacks a table or a column of ours
             return EX_DATAERR;
         case SQLITE_PERM:
         case SQLITE_READONLY:
         case SQLITE_AUTH:
             return EX_NOPERM;
-        default:  // a full disk, or one that fails
+        default:  // a full or failing disk
             return EX_IOERR;
     }
 }

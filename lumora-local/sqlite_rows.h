@@ -26,11 +26,11 @@ inline constexpr const char* kEventColumns =
 
 void insertEvent(SQLite::Database& database, const Event& event);
 
-/// What became of the occasion's request when it was carried out before; `nullopt` if it was not, or the
+/// The outcome of the occasion's request if it was carried out before; `nullopt` if it was not, or if the
 /// occasion has none. Throws ReusedKeyFailure.
 std::optional<PutOutcome> findRequest(SQLite::Database& database, const Occasion& occasion);
 
-/// Keeps the occasion's request, if it has one, and removes some of those that have been kept long enough.
+/// Stores the occasion's request, if it has one, and removes some expired ones.
 void keepRequest(SQLite::Database& database, const Occasion& occasion, const Event& event,
                  foundation::ByteView ticket);
 

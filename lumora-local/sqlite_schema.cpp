@@ -43,8 +43,8 @@ constexpr const char* kRecordTables = R"(
     );
 )";
 
-// How many records there are: counting ten million takes seconds. A store of version 2 may have it already;
-// programs that do not know of it count as well, for the triggers are the database's.
+// The number of records: counting ten million takes seconds. A store of version 2 may have it already.
+// Programs that do not know it also count, because the triggers belong to the database.
 constexpr const char* kRecordCount = R"(
     CREATE TABLE record_count (records INTEGER NOT NULL);
     INSERT INTO record_count (records) SELECT count(*) FROM record;
@@ -77,8 +77,8 @@ constexpr const char* kEventTable = R"(
         BEGIN SELECT RAISE(ABORT, 'events are never removed'); END;
 )";
 
-// Since version 3: the requests that issued and revoked, so that their repetition is known, and indexes by
-// which each search reads a page and no more. A store of version 2 may have an index of hashes already.
+// Since version 3: the requests that issued and revoked, to recognise a repetition, and indexes with which
+// each search reads only one page. A store of version 2 may have an index of hashes already.
 constexpr const char* kRequestTableAndSearches = R"(
     CREATE TABLE request (
         client TEXT NOT NULL,
@@ -104,7 +104,7 @@ void setVersion(SQLite::Database& database) {
     database.exec("PRAGMA user_version = " + std::to_string(kCurrentVersion));
 }
 
-/// A copy as of the last commit, through a connection of its own: the caller's transaction goes on meanwhile.
+/// A copy at the last commit, through a separate connection: the caller's transaction continues.
 void keepCopy(const std::string& path, int version) {
     const std::string copy = freeName(path, ".version-" + std::to_string(version));
     writeNewFile(copy, {}, 0600);
@@ -121,7 +121,7 @@ void keepCopy(const std::string& path, int version) {
     flushDirectory(std::filesystem::path(copy).parent_path().string());
 }
 
-/// The first events of a store that had none: its records as they are.
+/// The first events of a store without events: its present records.
 void logExistingRecords(SQLite::Database& database) {
     SQLite::Statement row(database,
                           "SELECT environment, name, label, revoked, signed_at, ticket FROM record"
@@ -152,7 +152,7 @@ void logExistingRecords(SQLite::Database& database) {
 void configureSqlite(SQLite::Database& database) {
     database.exec("PRAGMA foreign_keys = ON");
     database.exec("PRAGMA synchronous = FULL");
-    // The process may write in its own directory only, and SQLite's temporary files are elsewhere.
+    // The process may write only in its own directory, and SQLite's temporary files are elsewhere.
     database.exec("PRAGMA temp_store = MEMORY");
 }
 

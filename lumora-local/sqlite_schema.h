@@ -9,7 +9,7 @@ class Database;
 
 namespace pinwell::lumora {
 
-/// How long a writer waits for another process's write.
+/// The time that a writer waits for another process's write.
 inline constexpr int kBusyTimeoutMilliseconds = 10'000;
 
 /// Settings that every connection needs.

@@ -23,7 +23,7 @@ using foundation::Data;
 using foundation::Date;
 using foundation::format;
 
-/// Runs database work; what the library throws becomes a Failure.
+/// Runs database work, and turns the library's exceptions into Failure.
 template <class Work>
 auto guarded(Work&& work) {
     try {
@@ -43,7 +43,7 @@ Data toData(const SQLite::Column& column) {
     return foundation::toData(view);
 }
 
-/// Ends a statement that is kept: it holds its transaction open until then.
+/// Ends a reused statement, which keeps its transaction open until then.
 class UnfinishedStatement {
   public:
     explicit UnfinishedStatement(SQLite::Statement& statement) : statement_(statement) {}
@@ -203,7 +203,7 @@ auto SqliteStore::reading(Work work) {
 
 std::optional<Delivery> SqliteStore::findTicket(Environment environment, const std::string& recordName) {
     return reading([&]() -> std::optional<Delivery> {
-        // An asset's bytes are left where they are: the answer needs their number alone.
+        // The asset's bytes are not read: the response needs only their number.
         SQLite::Statement& row = *findTicket_;
         const UnfinishedStatement unfinished(row);
         row.bind(1, environmentText(environment));
@@ -245,12 +245,12 @@ std::size_t SqliteStore::countRecords() {
     });
 }
 
-/// Runs work within a transaction. What it changed is on the disk when this returns.
+/// Runs work within a transaction. When this returns, the changes are on the disk.
 template <class Work>
 auto SqliteStore::changing(Work work) {
     const std::lock_guard lock(mutex_);
     return guarded([&] {
-        // Immediate: a transaction that starts by reading cannot be upgraded behind another writer.
+        // Immediate: a transaction that starts by reading cannot be upgraded after another writer.
         SQLite::Transaction transaction(*database_, SQLite::TransactionBehavior::IMMEDIATE);
         if (guard_) guard_(StoreUse::changing);
         auto result = work();
@@ -390,7 +390,7 @@ void SqliteStore::walkContents(const ContentsVisitor& visitor) {
 
 void SqliteStore::holdStill(const std::function<void(const std::function<void()>& confirm)>& work) {
     guarded([&] {
-        // A connection of its own: readers go on beside a writer, also in this process.
+        // A separate connection: readers continue beside a writer, also in this process.
         SQLite::Database writer(path_, SQLite::OPEN_READWRITE, kBusyTimeoutMilliseconds);
         const SQLite::Transaction transaction(writer, SQLite::TransactionBehavior::IMMEDIATE);
         work([] {});

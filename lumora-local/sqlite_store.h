@@ -19,11 +19,11 @@ namespace pinwell::lumora {
 
 class SqliteStore final : public RecordStore {
   public:
-    /// Makes an empty store, readable by its owner alone. Throws Failure if anything is at `path`.
+    /// Makes an empty store, readable only by its owner. Throws Failure if `path` exists.
     static void create(const std::string& path);
 
-    /// Opens an existing one. A store of an earlier version is brought forward first, in one transaction; a
-    /// copy of what it was stays beside it (`PATH.version-N`). Throws Failure.
+    /// Opens an existing one. A store of an earlier version is first upgraded in one transaction; a copy of
+    /// its earlier state remains beside it (`PATH.version-N`). Throws Failure.
     explicit SqliteStore(const std::string& path, StoreGuard guard = {});
     ~SqliteStore() override;
 
@@ -31,7 +31,7 @@ class SqliteStore final : public RecordStore {
     std::optional<foundation::Data> findAsset(const std::string& identifier) override;
     std::size_t countRecords() override;
 
-    /// From `PRAGMA data_version`, which tells of other connections, and a count of this one's own changes.
+    /// From `PRAGMA data_version` for other connections, and a count of this one's own changes.
     std::optional<std::uint64_t> changeCounter() override;
     PutOutcome put(Environment environment, const std::vector<SignedRecord>& records,
                    const Occasion& occasion) override;

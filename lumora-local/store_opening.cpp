@@ -18,8 +18,7 @@ namespace {
 
 using foundation::format;
 
-/// Whether service.json still names the store that was opened. The file is read again only after it has
-/// changed.
+/// Whether service.json still names the opened store. The file is read again only after a change.
 class StoreWatch {
   public:
     explicit StoreWatch(const ServiceDirectory& directory)
@@ -28,13 +27,13 @@ class StoreWatch {
     void check(StoreUse use) {
         if (use == StoreUse::changing) requireChangesAllowed(opened_);
         const std::lock_guard lock(mutex_);
-        // A file that is open outlives its name; what takes its place has other records.
+        // An open file outlives its name; a file that replaces it has other records.
         if (!(recordsNow() == records_)) {
             throw Failure(EX_TEMPFAIL, format("%@ is not the file that was opened; start again to use it",
                                               opened_.storePath()));
         }
         const Signature now = signatureNow();
-        // Who changes records has to be certain: two changes within a clock tick look alike.
+        // A writer needs certainty: two changes within a clock tick look alike.
         if (use == StoreUse::changing || !(now == seen_)) moved_ = hasMoved(use);
         seen_ = now;
         if (moved_) {
@@ -59,7 +58,7 @@ class StoreWatch {
         return {status.st_dev, status.st_ino, status.st_mtim.tv_sec, status.st_mtim.tv_nsec};
     }
 
-    /// The file with the records alone, not its contents; nothing of it for a database.
+    /// Only the file with the records, not its contents; empty for a database.
     Signature recordsNow() const {
         struct stat status {};
         if (opened_.storeUrl() || ::stat(opened_.storePath().c_str(), &status) != 0) return {};
@@ -70,7 +69,7 @@ class StoreWatch {
         try {
             return ServiceDirectory::open(opened_.path()).storeUrl() != opened_.storeUrl();
         } catch (const Failure&) {
-            // Lookups go on while somebody edits the file.
+            // Lookups continue while somebody edits the file.
             if (use == StoreUse::changing) throw;
             return moved_;
         }

@@ -1,4 +1,4 @@
-// What the program prints. Texts are escaped already (foundation::format does that).
+// The program's output. Texts are escaped already (foundation::format does that).
 #pragma once
 
 #include <cstdio>

@@ -10,7 +10,7 @@
 //   12      4     B, length of the payload
 //   16      A     DER SEQUENCE of the signer's certificate, its issuer's and the root's
 //   16+A    B     payload
-//   16+A+B  72    ECDSA signature over SHA-256, DER (X9.62), left-aligned, zero bytes behind it
+//   16+A+B  72    ECDSA signature over SHA-256, DER (X9.62), left-aligned, followed by zero bytes
 //
 // Payload:
 //
@@ -34,7 +34,7 @@
 
 namespace pinwell::lumora {
 
-/// What readers of tickets accept at most.
+/// The maximum that readers of tickets accept.
 inline constexpr std::size_t kMaximumPayloadSize = 16 * 1024 * 1024;
 inline constexpr std::size_t kSignatureFieldSize = 72;
 
@@ -44,11 +44,11 @@ struct TicketContents {
     foundation::Date signedAt;
 };
 
-/// The payload alone. Throws Failure (EX_DATAERR) for a hash whose length is not its digest type's, for a
-/// digest type that no ticket can carry, and for more hashes than fit the maximum.
+/// Only the payload. Throws Failure (EX_DATAERR) for a hash whose length does not fit its digest type, for a
+/// digest type that no ticket can contain, and for more hashes than the maximum allows.
 foundation::Data encodeTicketPayload(const TicketContents& contents);
 
-/// Signs with one key. Immutable after construction; may be used from any thread.
+/// Signs with one key. Immutable after construction; for any thread.
 class TicketSigner {
   public:
     /// `chainPaths` are PEM files, the signer's own certificate first. Throws Failure (EX_CONFIG) if the key

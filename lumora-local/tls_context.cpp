@@ -13,7 +13,7 @@
 namespace pinwell::lumora {
 namespace {
 
-/// A pipe would hold the reload, and the signals after it, until somebody writes to it.
+/// A pipe would block the reload, and the signals after it, until somebody writes to it.
 void requireRegularFile(const std::string& path) {
     struct stat status {};
     if (stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode))
@@ -27,7 +27,7 @@ std::shared_ptr<boost::asio::ssl::context> load(const TlsFiles& files) {
     SSL_CTX* native = context->native_handle();
     require(SSL_CTX_set_min_proto_version(native, TLS1_2_VERSION) == 1, "set up TLS");
     SSL_CTX_set_options(native, SSL_OP_NO_RENEGOTIATION | SSL_OP_NO_COMPRESSION);
-    // An idle connection keeps no record buffers; the rest is what TlsStream counts on.
+    // An idle connection keeps no record buffers; TlsStream relies on the other flags.
     SSL_CTX_set_mode(native, SSL_MODE_RELEASE_BUFFERS | SSL_MODE_ENABLE_PARTIAL_WRITE |
                                  SSL_MODE_ACCEPT_MOVING_WRITE_BUFFER);
     SSL_CTX_set_read_ahead(native, 1);  // a record in one call of the system

@@ -11,9 +11,9 @@ class context;
 
 namespace pinwell::lumora {
 
-/// PEM files: the certificate chain with the server's certificate first, and its key, which the passphrase at
-/// `passphraseFile` (passphrase.h) opens if it is encrypted. With `clientAuthorities`, a file with their
-/// certificates, each client has to show a certificate (client_certificate.h).
+/// PEM files: the certificate chain with the server's certificate first, and its key. If the key is
+/// encrypted, the passphrase at `passphraseFile` (passphrase.h) opens it. With `clientAuthorities`, a file
+/// with their certificates, each client must send a certificate (client_certificate.h).
 struct TlsFiles {
     std::string certificate;
     std::string key;
@@ -21,14 +21,14 @@ struct TlsFiles {
     std::string clientAuthorities{};
 };
 
-/// TLS 1.2 or later, without renegotiation and compression. May be used from any thread.
+/// TLS 1.2 or later, without renegotiation and compression. For any thread.
 class TlsContext {
   public:
     /// Throws Failure.
     explicit TlsContext(TlsFiles files);
     ~TlsContext();
 
-    /// What new connections use. Connections keep the one that they began with.
+    /// The context for new connections. A connection keeps its first context.
     std::shared_ptr<boost::asio::ssl::context> current() const;
 
     /// Reads these files, or the same ones again. Throws Failure if they cannot be used; current() stays as
@@ -36,7 +36,7 @@ class TlsContext {
     void reload(const TlsFiles& files);
     void reload() { reload(files_); }
 
-    /// Whether each client has to show a certificate.
+    /// Whether each client must send a certificate.
     bool asksForClients() const noexcept { return !files_.clientAuthorities.empty(); }
 
   private:

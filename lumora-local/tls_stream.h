@@ -1,7 +1,7 @@
-// TLS on a socket of Asio: what Asio and Beast ask of a stream, over OpenSSL's own reading and writing.
+// TLS on a socket of Asio: a stream for Asio and Beast, over OpenSSL's own reading and writing.
 //
 // Asio's stream keeps 68 KiB of buffers for each connection, idle or not, and copies all bytes through them.
-// Here OpenSSL reads and writes the socket, and has buffers only while there is something in them
+// Here OpenSSL reads and writes the socket, and has buffers only while they have contents
 // (SSL_MODE_RELEASE_BUFFERS).
 #pragma once
 
@@ -31,7 +31,7 @@ class TlsStream {
     using executor_type = next_layer_type::executor_type;
     using ErrorCode = boost::system::error_code;
 
-    /// The context may go away before the stream does.
+    /// The context may be destroyed before the stream.
     TlsStream(next_layer_type socket, boost::asio::ssl::context& context)
         : socket_(std::move(socket)), ssl_(SSL_new(context.native_handle())) {
         ErrorCode error;
@@ -47,7 +47,7 @@ class TlsStream {
     lowest_layer_type& lowest_layer() { return socket_.lowest_layer(); }
     SSL* native_handle() { return ssl_.get(); }
 
-    /// `handler` gets the error and a number without a meaning.
+    /// `handler` gets the error and a meaningless number.
     template <class Handler>
     auto async_handshake(Handler&& handler) {
         return start([](SSL* ssl, std::size_t&) { return SSL_do_handshake(ssl); },
@@ -76,7 +76,7 @@ class TlsStream {
             std::forward<Handler>(handler));
     }
 
-    /// Says goodbye, and waits for the peer's. `handler` as for the handshake.
+    /// Sends the end of TLS, and waits for the peer's. `handler` as for the handshake.
     template <class Handler>
     auto async_shutdown(Handler&& handler) {
         return start(
@@ -128,7 +128,7 @@ class TlsStream {
             handler, socket_);
     }
 
-    /// What OpenSSL's last call on this thread ended with.
+    /// The outcome of OpenSSL's last call on this thread.
     static ErrorCode errorOf(int wanted) {
         if (wanted == SSL_ERROR_NONE) return {};
         if (wanted == SSL_ERROR_ZERO_RETURN) return boost::asio::error::eof;

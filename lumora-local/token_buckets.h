@@ -1,7 +1,7 @@
-// How often each of many clients may do something: a bucket of tokens for each name.
+// The rates of many clients: a bucket of tokens for each name.
 //
 // A bucket holds `burst` tokens and gets one back every `interval`. The table is bounded: beyond its bound,
-// the bucket that has been left alone longest is forgotten, as if it were full.
+// the least recently used bucket is removed, as if it were full.
 #pragma once
 
 #include <chrono>
@@ -15,7 +15,7 @@
 
 namespace pinwell::lumora {
 
-/// May be used from any thread.
+/// For any thread.
 class TokenBuckets {
   public:
     using Clock = std::chrono::steady_clock;
@@ -29,7 +29,7 @@ class TokenBuckets {
     explicit TokenBuckets(Allowance allowance, std::size_t clients = 1024, Now now = Clock::now)
         : allowance_(allowance), clients_(clients), now_(std::move(now)) {}
 
-    /// Takes a token. `nullopt` if there was one; otherwise how many whole seconds to wait for the next, at
+    /// Takes a token. `nullopt` if there was one; otherwise the number of whole seconds until the next, at
     /// least one.
     std::optional<std::int64_t> take(const std::string& name);
 
@@ -46,7 +46,7 @@ class TokenBuckets {
     const std::size_t clients_;
     const Now now_;
     mutable std::mutex mutex_;
-    Buckets buckets_;  // the one used last comes first
+    Buckets buckets_;  // the most recently used one is first
     std::unordered_map<std::string, Buckets::iterator> places_;
 };
 

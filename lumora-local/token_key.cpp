@@ -35,7 +35,7 @@ constexpr std::size_t kMaximumSlots = 256;
 constexpr std::string_view kFilePrefix = "file:";
 
 [[noreturn]] void fail(const std::string& uri, std::string_view what) {
-    // The query may say where the PIN is, and messages end up in logs.
+    // The query may have the place of the PIN, and messages are written to logs.
     throw Failure(EX_CONFIG, format("%@: %@", uri.substr(0, uri.find('?')), what));
 }
 

@@ -1,10 +1,10 @@
 // A signing key in a PKCS #11 token, used in the process that opens it.
 //
 // The URI (RFC 7512) names the token by `token`, `serial`, `manufacturer` or `model`, and the key by `object`
-// (its label) or `id`. `module-path` names the token's library; without it, those that p11-kit's
-// configuration lists are asked. `pin-source` is a file with the PIN, or "credential:NAME" (passphrase.h). A
-// PIN in the URI itself is refused. One private EC key on P-256 must fit; its public key must be in the token
-// too.
+// (its label) or `id`. `module-path` names the token's library; without it, the libraries in p11-kit's
+// configuration are used. `pin-source` is a file with the PIN, or "credential:NAME" (passphrase.h). A PIN in
+// the URI itself is refused. Exactly one private EC key on P-256 must match; the token must also have its
+// public key.
 #pragma once
 
 #include <memory>

@@ -1,4 +1,4 @@
-// The commands that look after a service: client-certificate, rotate, certify, check, backup, restore.
+// The commands that maintain a service: client-certificate, rotate, certify, check, backup, restore.
 #pragma once
 
 #include <string>
@@ -10,7 +10,7 @@ class App;
 
 namespace pinwell::lumora {
 
-/// What their command lines say, as text. Must outlive the parsing.
+/// The values of their command lines, as text. Must outlive the parsing.
 struct UpkeepVerbs {
     std::string directory;
     std::vector<std::string> words;  // after the directory
