@@ -1,4 +1,4 @@
-// What a build says that was made without one of its optional parts; compiled into such a build alone.
+// The messages of a build without one of its optional parts; compiled only into such a build.
 #include <gtest/gtest.h>
 
 #include <functional>

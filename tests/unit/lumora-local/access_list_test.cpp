@@ -17,7 +17,7 @@ class AccessListTest : public testing::Test {
   protected:
     void write(const std::string& text) const { writeFile(path_, text); }
 
-    /// What is said of a file with this text.
+    /// The complaint about a file with this text.
     std::string faultOf(const std::string& text) const {
         write(text);
         try {

@@ -15,7 +15,7 @@ class SSLClient;
 
 namespace pinwell::lumora::test {
 
-/// A client's answer, whatever library it came through. `status` is -1 without an answer.
+/// The response to a client, from either library. `status` is -1 without a response.
 struct AdminAnswer {
     int status = -1;
     std::string body;
@@ -46,7 +46,7 @@ class AdminClient {
 };
 
 /// A service directory for 127.0.0.1 with access.toml and, in `clients/NAME` beside it, certificates for
-/// "ci.example" (issue, read), "manager" (issue, revoke, read), "auditor" (read) and "stranger" (nothing).
+/// "ci.example" (issue, read), "manager" (issue, revoke, read), "auditor" (read) and "stranger" (no role).
 class ServiceWithClients {
   public:
     ServiceWithClients();
@@ -78,7 +78,7 @@ class AdminInstance {
     /// SIGKILL.
     void kill();
 
-    /// SIGTERM; what it has written.
+    /// Sends SIGTERM; returns the output.
     pinwell::test::ProcessResult stop();
 
   private:

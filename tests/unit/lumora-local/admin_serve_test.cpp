@@ -107,7 +107,7 @@ TEST_F(AdminServeTest, ListsEveryHashInTheTicketTheRecordsOwnFirst) {
     EXPECT_EQ(*listed[1].string(), recordNamed(2));
 }
 
-// The service may write in its own directory only, and a change of many rows must not need another place.
+// The service may write only in its own directory, and a change of many rows must not need another place.
 TEST_F(AdminServeTest, ReissuesAndRevokesARecordOfThousandsOfHashes) {
     AdminInstance instance(service_);
     AdminClient manager = instance.client("manager");
@@ -160,7 +160,7 @@ TEST_F(AdminServeTest, GivesARepeatedRequestTheSameAnswer) {
 }
 
 TEST_F(AdminServeTest, KnowsARepeatedRequestAfterAKill) {
-    // However far the first attempt came when the service was killed: repeated, it is carried out once.
+    // Wherever the kill interrupts the first attempt, the repeated request is carried out once.
     std::vector<std::string> records;
     for (int round = 0; round < 6; ++round) {
         auto instance = std::make_unique<AdminInstance>(service_);
@@ -343,7 +343,7 @@ TEST_F(AdminServeTest, IsNotThereUnlessItIsAskedFor) {
     EXPECT_EQ(process.resultSoFar().output.find("administration"), std::string::npos);
 }
 
-/// What keeps the service from starting is one line that names the file, and 78.
+/// If the service cannot start, it prints one line that names the file, and ends with 78.
 class AdminStartTest : public AdminServeTest {
   protected:
     void expectRefused(const std::vector<std::string>& options, int exitStatus,

@@ -1,4 +1,4 @@
-// Who may do what at the administration listener, without a socket.
+// Rights at the administration listener, without a socket.
 #include "lumora-local/admin_service.h"
 
 #include <gtest/gtest.h>

@@ -1,4 +1,4 @@
-// Which clients the administration listener lets in.
+// The clients that the administration listener accepts.
 #include <gtest/gtest.h>
 
 #include "admin_instance.h"
@@ -36,7 +36,7 @@ class AdminTrustTest : public testing::Test {
         instance_ = std::make_unique<AdminInstance>(service_, authorities_);
     }
 
-    /// What a client gets that shows this certificate, and further ones of its chain.
+    /// The status for a client with this certificate, and with further ones of its chain.
     int statusFor(const IssuedCertificate& shown,
                   const std::vector<const IssuedCertificate*>& chain = {}) const {
         std::string pem = encodeCertificate(shown.certificate.get());
@@ -75,7 +75,7 @@ TEST_F(AdminTrustTest, LetsInAChainOverAnIntermediate) {
     EXPECT_EQ(statusFor(shown), -1);
     writeFile(service_.scratch("chain.pem"),
               encodeCertificate(shown.certificate.get()) + encodeCertificate(intermediate.certificate.get()));
-    // The library of the other tests sends the first certificate of a file alone.
+    // The library of the other tests sends only the first certificate of a file.
     const auto answer = pinwell::test::runProcess(
         {.executable = "/usr/bin/curl",
          .arguments = {"--silent", "--show-error", "--fail", "--cacert",
@@ -106,7 +106,7 @@ TEST_F(AdminTrustTest, KeepsOutCertificatesOfOtherAuthorities) {
     EXPECT_EQ(statusFor(issueCertificate(client(), &other, Date::now())), -1);
     EXPECT_EQ(statusFor(issueCertificate(client(), &other, Date::now()), {&other}), -1);
     EXPECT_EQ(statusFor(issueCertificate(client(), nullptr, Date::now())), -1);
-    // Those that the program makes are of another authority here.
+    // The program's own certificates are of another authority here.
     EXPECT_EQ(instance_->client("auditor").get("/v1/records").status, -1);
 }
 

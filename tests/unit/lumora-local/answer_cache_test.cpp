@@ -72,7 +72,7 @@ TEST(AnswerCache, HoldsAsManyBytesAsItMay) {
     EXPECT_EQ(cache.find(1, kProduction, "large"), nullptr) << "it would drive out all others";
 }
 
-/// Lookups over one connection to a store, changes over another, as another process makes them.
+/// Lookups over one connection to a store, and changes over another, as from another process.
 class CachedLookups : public testing::Test {
   protected:
     CachedLookups() { SqliteStore::create(path_); }

@@ -26,7 +26,7 @@ class AuthorityTest : public testing::Test {
     const std::vector<X509*> all_{root_.get(), intermediate_.get(), signer_.get(), server_.get()};
 };
 
-/// The library's own judgement of a chain, without purposes: those are asked for apart.
+/// The library's own judgement of a chain, without purposes, which have their own check.
 int verify(X509* leaf, X509* intermediate, X509* root, std::int64_t at) {
     X509_STORE* store = X509_STORE_new();
     X509_STORE_add_cert(store, root);

@@ -1,4 +1,4 @@
-// Looking into certificates and keys with the cryptographic library alone.
+// Reads certificates and keys with only the cryptographic library.
 #pragma once
 
 #include <openssl/evp.h>

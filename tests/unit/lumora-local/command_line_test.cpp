@@ -16,7 +16,7 @@ using pinwell::test::writeFile;
 using test::Outcome;
 using test::runProgram;
 
-/// One line, with the program's name, and nothing on standard output.
+/// One line, with the program's name, and an empty standard output.
 void expectFailure(const Outcome& outcome, int exitStatus) {
     EXPECT_EQ(outcome.exitStatus, exitStatus) << outcome.err;
     EXPECT_EQ(outcome.out, "");

@@ -72,7 +72,7 @@ class CommandsTest : public testing::Test {
         return EX_OK;
     }
 
-    /// The flags in the ticket that lookups of the record are answered with.
+    /// The flags in the ticket that a lookup of the record returns.
     std::uint32_t deliveredFlags(const std::string& name) {
         const auto delivery = store_.findTicket(Environment::production, name);
         const Data ticket = delivery->inlineTicket ? *delivery->inlineTicket

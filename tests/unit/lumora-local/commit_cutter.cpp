@@ -16,7 +16,7 @@ namespace {
 using foundation::FileDescriptor;
 using pinwell::test::require;
 
-constexpr int kTick = 20;  // milliseconds between two looks at whether it is over
+constexpr int kTick = 20;  // milliseconds between two checks for the end
 
 sockaddr_un addressIn(const std::string& directory) {
     const std::string path = directory + "/.s.PGSQL.5432";

@@ -1,4 +1,4 @@
-// Something between a store and its database that loses a commit, or the answer to it, or never answers.
+// A relay between a store and its database. It loses a commit, or the response to it, or never responds.
 #pragma once
 
 #include <atomic>
@@ -17,10 +17,10 @@ class CommitCutter {
         nothing,
         commit,  // the connection ends before the server hears of the commit
         answer,  // it ends after the server has committed
-        all,     // nothing reaches the server, and nothing comes from it
+        all,     // no byte passes in either direction
     };
 
-    /// Passes connections on to the server whose socket is in that directory.
+    /// Passes connections on to the server with its socket in that directory.
     explicit CommitCutter(std::string serverDirectory);
     ~CommitCutter();
     CommitCutter(const CommitCutter&) = delete;
@@ -29,7 +29,7 @@ class CommitCutter {
     /// The directory of its own socket.
     const std::string& directory() const { return directory_.path(); }
 
-    /// What it does to the next commit; then it passes everything on again.
+    /// Its action on the next commit; after that it passes everything on again.
     void cut(Cut cut) { next_ = cut; }
 
     int cuts() const { return cuts_; }

@@ -1,4 +1,4 @@
-// The time at which the tests of the record service make what they look at.
+// The time for all objects in the tests of the record service.
 #pragma once
 
 #include "foundation/date.h"

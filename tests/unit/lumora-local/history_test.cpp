@@ -33,7 +33,7 @@ class HistoryTest : public testing::Test {
         store.put(Environment::production, {entry}, {Date{77}, "tester", std::nullopt, "", false});
     }
 
-    /// Changes the database behind the program's back.
+    /// Changes the database without the program.
     void tamper(const std::string& sql) {
         SQLite::Database database(path_, SQLite::OPEN_READWRITE);
         database.exec("DROP TRIGGER IF EXISTS event_is_not_changed");

@@ -1,4 +1,4 @@
-// Clients that are broken, slow, greedy or hostile. Each test ends by showing that the service still answers.
+// Broken, slow, greedy or hostile clients. Each test ends with a check that the service still responds.
 #include <gtest/gtest.h>
 #include <httplib.h>
 #include <signal.h>
@@ -21,7 +21,7 @@ class HostileClient : public testing::Test {
         EXPECT_EQ(service_.wait(), 0) << service_.errors();
     }
 
-    /// The whole answer to some bytes, after which the service must close by itself.
+    /// The whole response to some bytes, after which the service must close by itself.
     std::string answerTo(const std::string& bytes) {
         RawClient client(service_);
         client.send(bytes);
@@ -154,7 +154,7 @@ TEST_F(HostileClient, CompressesItsBody) {
 }
 
 TEST_F(HostileClient, SendsABodyWhereNoneIsRead) {
-    // It must not be taken for a second request.
+    // It must not count as a second request.
     const std::string smuggled = "GET /healthz HTTP/1.1\r\nHost: localhost\r\n\r\n";
     const std::string length = "Content-Length: " + std::to_string(smuggled.size()) + "\r\n\r\n";
     for (const std::string& head :

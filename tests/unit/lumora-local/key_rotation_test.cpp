@@ -1,5 +1,4 @@
-// Keys that are encrypted, kept elsewhere, certified elsewhere and replaced; and how a service is looked
-// over.
+// Keys that are encrypted, stored elsewhere, certified elsewhere and replaced; and the check of a service.
 #include "lumora-local/key_rotation.h"
 
 #include <gtest/gtest.h>
@@ -42,7 +41,7 @@ Data ticketFrom(const ServiceDirectory& directory) {
     return directory.openSigner().makeTicket({{{2, Data(20)}}, false, kNow});
 }
 
-/// The first certificate in a ticket that a directory's signer makes.
+/// Whether a ticket by the directory's signer begins with this certificate.
 bool hasCertificateOf(const Data& ticket, const std::string& pemPath) {
     const auto certificate = test::certificateFromPem(readFile(pemPath));
     unsigned char* der = nullptr;
@@ -68,7 +67,7 @@ class Keys : public testing::Test {
 
     const TemporaryDirectory parent_;
     const std::string path_ = parent_ / "site";
-    mutable std::string last_;  // what check said
+    mutable std::string last_;  // the output of check
 };
 
 TEST_F(Keys, AreEncryptedWithAPassphraseFromAFile) {
@@ -185,7 +184,7 @@ TEST_F(Keys, OfTheServerAreReplacedForTheSameHosts) {
     EXPECT_EQ(check(), 0) << last_;
 }
 
-/// A service whose signer another service's authority certifies.
+/// A service with a signer that another service's authority certifies.
 class CertifiedElsewhere : public Keys {
   protected:
     CertifiedElsewhere() {
@@ -196,7 +195,7 @@ class CertifiedElsewhere : public Keys {
 
     std::string inAuthority(const std::string& name) const { return authority_.servicePath(name); }
 
-    /// The chain that the authority answers a request with.
+    /// The chain that the authority returns for a request.
     std::string answer(const std::string& request) const {
         const test::Bio bio(BIO_new_mem_buf(request.data(), static_cast<int>(request.size())));
         X509_REQ* read = PEM_read_bio_X509_REQ(bio.get(), nullptr, nullptr, nullptr);

@@ -36,7 +36,7 @@ constexpr char kDone = 'd';
     ::_exit(0);
 }
 
-/// Lets the child run to its next stop. False if it has ended.
+/// Lets the child run to its next stop. Returns false if it has ended.
 bool nextStop(pid_t child, int& status) {
     require(::ptrace(PTRACE_SYSCALL, child, nullptr, nullptr) == 0, "ptrace");
     require(::waitpid(child, &status, 0) == child, "waitpid");

@@ -1,4 +1,4 @@
-// A child process that is killed at a system call of its own, counted from where it says that it begins.
+// A child process that is killed at one of its system calls, counted from a point that it marks.
 #pragma once
 
 #include <functional>
@@ -9,7 +9,7 @@ namespace pinwell::lumora::test {
 
 struct KilledChild {
     bool reachedTheEnd = false;  // it made fewer calls than it took to be killed
-    bool acknowledged = false;   // what it does was done, and it said so
+    bool acknowledged = false;   // its action was complete, and it said so
     std::string said;            // why it failed, if it did
 };
 

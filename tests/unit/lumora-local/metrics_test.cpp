@@ -1,4 +1,4 @@
-// The text that Prometheus gets, made of counts.
+// The text for Prometheus, made from counts.
 #include "lumora-local/metrics.h"
 
 #include <gtest/gtest.h>

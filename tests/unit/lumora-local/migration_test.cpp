@@ -1,4 +1,4 @@
-// Moving a service's records into a database, and what its commands say of databases that do not fit.
+// Moving a service's records into a database, and the messages about unsuitable databases.
 #include "lumora-local/migration.h"
 
 #include <SQLiteCpp/SQLiteCpp.h>
@@ -58,7 +58,7 @@ class MigrationTest : public testing::Test {
     std::string descriptionPath() const { return service_ + "/service/service.json"; }
     std::string description() const { return readFile(descriptionPath()); }
 
-    /// One line, 78, and the description is as it was.
+    /// One line, 78, and an unchanged description.
     void expectRefused(std::vector<std::string> arguments, const std::string& part) const {
         const std::string before = description();
         const ProcessResult result = test::runLumora(std::move(arguments));
@@ -90,7 +90,7 @@ TEST_F(MigrationTest, CopiesAllAndNamesTheDatabase) {
     EXPECT_EQ(summarize(*store), summarize(old));
     EXPECT_EQ(verifyHistory(*store, migration.head).events, 5U);
     EXPECT_EQ(store->countRecords(), 3U);
-    // The chain goes on.
+    // The chain continues.
     store->put(kProduction, {makeRecord("d", "fourth")}, {Date{200}, "tester", std::nullopt, "", false});
     EXPECT_EQ(verifyHistory(*store, migration.head).events, 6U);
 }

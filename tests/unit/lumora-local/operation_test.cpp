@@ -1,4 +1,4 @@
-// The service as whoever operates it sees it: readiness, logs, the service manager, backups, settings.
+// The service for its operator: readiness, logs, the service manager, backups, settings.
 #include <SQLiteCpp/SQLiteCpp.h>
 #include <gtest/gtest.h>
 #include <httplib.h>
@@ -97,7 +97,7 @@ TEST(JsonLog, HasAnObjectForEachRequest) {
     EXPECT_EQ(requests[1]["status"].unsignedIntegerValue(), 404U);
 }
 
-/// Where the service manager would listen.
+/// The socket of the service manager.
 class ManagerSocket {
   public:
     explicit ManagerSocket(const std::string& path)
@@ -110,7 +110,7 @@ class ManagerSocket {
         }
     }
 
-    /// The next message, which must come.
+    /// The next message, which must arrive.
     std::string next() const {
         std::array<char, 512> buffer{};
         const ssize_t count = ::recv(socket_.get(), buffer.data(), buffer.size(), 0);
@@ -255,7 +255,7 @@ TEST_F(Backup, FindsTheServiceInTheEnvironment) {
     EXPECT_EQ(runProgram({"check"}).exitStatus, 0);
 }
 
-/// Whether the published schema takes a document.
+/// Whether the published schema accepts a document.
 bool schemaTakes(const std::string& text) {
     const TemporaryDirectory directory;
     writeFile(directory / "document", text);

@@ -1,4 +1,4 @@
-// The page for people: what it shows, and that nothing in the records becomes markup.
+// The page for people: its contents, and that nothing in the records becomes markup.
 #include "lumora-local/page.h"
 
 #include <gmock/gmock.h>
@@ -52,7 +52,7 @@ Event eventOf(Action action) {
     return event;
 }
 
-/// That nothing of kMarkup got through as markup.
+/// Matches if kMarkup became no markup.
 testing::Matcher<const std::string&> HasNoForeignMarkup() {
     return AllOf(Not(HasSubstr("<script")), Not(HasSubstr("<b ")), Not(HasSubstr("\"'>")),
                  HasSubstr("&lt;script&gt;"));
@@ -213,7 +213,7 @@ class PageRoutes : public testing::Test {
         store_->put(environment, {record}, test::kOccasion);
     }
 
-    /// The answer of the first row that fits, as the listener chooses it.
+    /// The response of the first matching row, as in the listener.
     Answer get(const std::string& target) {
         RequestHead head;
         head.method = "GET";

@@ -74,7 +74,7 @@ PostgresCluster::~PostgresCluster() {
 }
 
 void PostgresCluster::makeFolders() {
-    // The owner of the cluster has to get here.
+    // The owner of the cluster needs access to it.
     require(::chmod(directory_.path().c_str(), 0755) == 0, "chmod");
     for (const std::string& folder : {path(), socketDirectory()}) {
         require(::mkdir(folder.c_str(), 0700) == 0, "mkdir");
@@ -86,7 +86,7 @@ Command PostgresCluster::asOwner(const std::string& program, std::vector<std::st
     Command command{.executable = "/usr/bin/setpriv",
                     .environment = {{"PATH", "/usr/sbin:/usr/bin:/sbin:/bin"}, {"LC_ALL", "C"}},
                     .workingDirectory = directory_.path()};
-    // A server does not outlive its test, whatever ends that.
+    // A server never outlives its test, however the test ends.
     std::vector<std::string> before{"--pdeathsig", "QUIT"};
     if (::getuid() == 0) {
         const std::string user = std::to_string(kNobody);
@@ -100,7 +100,7 @@ Command PostgresCluster::asOwner(const std::string& program, std::vector<std::st
 
 void PostgresCluster::start() {
     std::filesystem::remove(path() + "/postmaster.pid");
-    // The tests end processes, not the machine: what was written is there, flushed or not.
+    // The tests end processes, not the machine: written data stay, flushed or not.
     server_ = std::make_unique<pinwell::test::RunningProcess>(asOwner(
         "postgres", {"-D", path(), "-k", socketDirectory(), "-c", "listen_addresses=", "-c", "fsync=off",
                      "-c", "shared_buffers=16MB", "-c", "max_connections=60", "-c", "autovacuum=off"}));

@@ -15,11 +15,11 @@ class PostgresCluster {
     /// Why there can be no cluster here; `nullopt` if there can be one.
     static std::optional<std::string> missing();
 
-    /// The cluster that the tests of a program share, started when it is first asked for.
+    /// The cluster that the tests of a program share, started at its first use.
     static PostgresCluster& shared();
 
-    /// Makes a cluster with the newest release that is installed, and starts it. The superuser makes it as
-    /// the user `nobody`, because PostgreSQL refuses to run as the superuser. Throws std::runtime_error.
+    /// Makes a cluster with the newest installed release, and starts it. The superuser makes it as the user
+    /// `nobody`, because PostgreSQL refuses to run as the superuser. Throws std::runtime_error.
     PostgresCluster();
 
     struct ReplicaOf {
@@ -41,10 +41,10 @@ class PostgresCluster {
     /// Runs SQL in a database, as the cluster's superuser; returns the fields, a row a line.
     std::string sql(const std::string& url, const std::string& statements) const;
 
-    /// Starts the server again, and waits until it answers.
+    /// Starts the server again, and waits until it responds.
     void start();
 
-    /// Ends it at once, as a power cut would as far as the database can see: no transaction is finished.
+    /// Ends it at once, like a power failure for the database: no transaction is finished.
     void stopImmediately();
 
     std::string socketDirectory() const { return directory_ / "socket"; }

@@ -1,4 +1,4 @@
-// What is PostgreSQL's alone: servers that are away, hang, follow another one, or hold something else.
+// Tests for PostgreSQL only: servers that are down, hang, follow another one, or have other contents.
 #include "lumora-local/postgres_store.h"
 
 #include <gtest/gtest.h>
@@ -226,7 +226,7 @@ TEST_F(LostDatabase, ThatHangsIsWaitedForABoundedTime) {
     store.put(kProduction, {makeRecord("a")}, kOccasion);
     cluster_->sql(place_.url, "SELECT 1");
     std::thread holder([&] {
-        // As a server that does not answer: the row is locked for longer than anybody waits.
+        // Simulates a server that does not respond: the table is locked for longer than any wait.
         cluster_->sql(place_.url, "BEGIN; LOCK TABLE lumora.record; SELECT pg_sleep(8)");
     });
     while (cluster_->sql(place_.url,

@@ -1,4 +1,4 @@
-// What every record store does, whatever keeps its records.
+// The behaviour of every record store, with any database.
 #include "lumora-local/record_store.h"
 
 #include <gtest/gtest.h>
@@ -155,7 +155,7 @@ TEST_P(RecordStoreTest, TellsHowManyRecordsAndEventsItHas) {
     EXPECT_EQ(store.facts().events, 0U);
     store.put(kProduction, {makeRecord("a", "1"), makeRecord("b", "2")}, kOccasion);
     store.put(Environment::development, {makeRecord("a", "3")}, kOccasion);
-    open()->put(kProduction, {makeRecord("a", "4")}, kOccasion);  // in the place of the first one
+    open()->put(kProduction, {makeRecord("a", "4")}, kOccasion);  // replaces the first one
     EXPECT_EQ(store.facts().records, 3U);
     EXPECT_EQ(store.facts().events, 4U);
     EXPECT_EQ(store.countRecords(), 3U);
@@ -251,7 +251,7 @@ TEST_P(RecordStoreTest, RefusesATicketForARevokedHashUnderAnotherName) {
     SignedRecord sameBytes = listing("2/3/a", {1});
     sameBytes.record.hashes.front().algorithm = 3;
     EXPECT_THROW(store.put(kProduction, {sameBytes}, kOccasion), Failure);
-    // A slice of what was revoked, and something that holds it.
+    // A slice of the revoked artefact, and an artefact that contains it.
     EXPECT_THROW(store.put(kProduction, {listing("2/2/b", {2})}, kOccasion), Failure);
     EXPECT_THROW(store.put(kProduction, {listing("2/2/c", {3, 1})}, kOccasion), Failure);
     EXPECT_EQ(eventsOf(store).size(), 1U);

@@ -1,4 +1,4 @@
-// Requests that come again, and attempts that were refused, in every store.
+// Repeated requests and refused attempts, in every store.
 #include <gtest/gtest.h>
 
 #include <atomic>

@@ -55,8 +55,8 @@ int exitStatusOf(int status) {
     return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
 }
 
-/// Waits until `name` stands in `directory`: the kernel tells, and a program that ends without it is noticed
-/// by the end of its process, which is asked between two messages.
+/// Waits until `name` exists in `directory`. The kernel reports it. If a program ends without the file, the
+/// check of the process between two messages notices it.
 void awaitFile(const std::string& directory, const std::string& name, pid_t process) {
     const FileDescriptor watch(::inotify_init1(IN_CLOEXEC));
     if (!watch || ::inotify_add_watch(watch.get(), directory.c_str(), IN_MOVED_TO | IN_CREATE) < 0) {
@@ -150,7 +150,7 @@ struct RawClient::Connection {
 };
 
 RawClient::RawClient(int port) : connection_(std::make_unique<Connection>()) {
-    ::signal(SIGPIPE, SIG_IGN);  // that the service hangs up on us is what some tests wait for
+    ::signal(SIGPIPE, SIG_IGN);  // in some tests the service hangs up on us
     connection_->socket = FileDescriptor(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
     sockaddr_in address{};
     address.sin_family = AF_INET;

@@ -1,4 +1,4 @@
-// The program under test as a process of its own, and clients that speak to it over TLS.
+// The program under test in a separate process, and clients that use it over TLS.
 #pragma once
 
 #include <sys/types.h>
@@ -18,7 +18,7 @@ class SSLClient;
 
 namespace pinwell::lumora::test {
 
-/// Where records are asked for.
+/// The path of lookups.
 inline constexpr const char* kLookupPath =
     "/database/1/com.ostrel.tm.ticket-delivery/production/public/records/lookup";
 
@@ -31,14 +31,14 @@ struct Outcome {
 /// Runs lumora-local to its end.
 Outcome runProgram(const std::vector<std::string>& arguments);
 
-/// A service in a directory of its own, serving on a free loopback port until the test ends.
+/// A service in a temporary directory, which serves on a free loopback port until the test ends.
 class RunningService {
   public:
     /// `settings` takes the place of service.json, unless it is empty.
     explicit RunningService(const std::vector<std::string>& options = {}, const std::string& settings = {});
     ~RunningService();
 
-    /// A fresh record with a ticket over made-up hashes; answers its name.
+    /// A fresh record with a ticket over arbitrary hashes; returns its name.
     std::string put(const CodeHash& hash, bool asAsset = false, bool revoked = false);
 
     int port() const noexcept { return port_; }
@@ -46,7 +46,7 @@ class RunningService {
     const ServiceDirectory& directory() const noexcept { return directory_; }
     std::string rootPath() const { return directory_.platformPath() + "/roots/lumora-local.pem"; }
 
-    /// Trusts the service's root alone, and checks the host.
+    /// Trusts only the service's root, and checks the host.
     std::unique_ptr<httplib::SSLClient> client() const;
 
     void sendSignal(int number) const;
@@ -54,7 +54,7 @@ class RunningService {
     /// Waits for the end. The exit status, or 128 and the signal's number.
     int wait();
 
-    /// What it has printed so far.
+    /// Its output so far.
     std::string output() const;
     std::string errors() const;
 
@@ -66,7 +66,7 @@ class RunningService {
     int port_ = 0;
 };
 
-/// A bare TLS connection, for what no well-behaved client would send.
+/// A bare TLS connection, for input that no well-behaved client would send.
 class RawClient {
   public:
     explicit RawClient(const RunningService& service) : RawClient(service.port()) {}
@@ -78,10 +78,10 @@ class RawClient {
     /// False when the service has closed the connection.
     bool send(const std::string& bytes);
 
-    /// All that comes until the service closes.
+    /// All input until the service closes.
     std::string readToEnd();
 
-    /// Everything up to the `count`-th empty line: that many heads of answers without bodies, say.
+    /// All input up to the `count`-th empty line, for example that many heads of responses without bodies.
     std::string readUntil(const std::string& mark, std::size_t count = 1);
 
     /// The certificate that the service shows, in DER.

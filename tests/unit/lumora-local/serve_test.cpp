@@ -197,7 +197,7 @@ TEST(Serve, FinishesARequestThatHasBegunBeforeItStops) {
     RunningService service;
     const std::string body = bodyFor({"unknown"});
     RawClient client(service);
-    // The interim answer proves that the request has begun when the signal is sent.
+    // The interim response proves that the request has begun before the signal is sent.
     ASSERT_TRUE(client.send(std::string("POST ") + kLookupPath +
                             " HTTP/1.1\r\nHost: localhost\r\nContent-Type: application/json\r\n"
                             "Expect: 100-continue\r\nContent-Length: " +

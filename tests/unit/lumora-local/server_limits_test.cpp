@@ -143,7 +143,7 @@ TEST(ServerLimits, DoNotHoldUpTheStop) {
     EXPECT_EQ(idle.readToEnd(), "");
 }
 
-/// TCP connections that never say a word.
+/// Silent TCP connections.
 class SilentPeers {
   public:
     void connect(int port) {

@@ -44,7 +44,7 @@ SignedRecord stateOf(const std::string& name, int state) {
             foundation::toData(std::to_string(state))};
 }
 
-/// The state that an answer tells of; 0 if there is no such record, -1 if the answer cannot be read.
+/// The state in a response; 0 if there is no such record, -1 if the response is unreadable.
 int stateIn(const std::string& body) {
     const auto document = foundation::parseJSON(foundation::asBytes(body));
     if (!document) return -1;

@@ -1,4 +1,4 @@
-// Instances of the real service on one database, and the count of what their clients are told.
+// Instances of the real service on one database, and counts of their clients' responses.
 #pragma once
 
 #include <atomic>
@@ -38,22 +38,22 @@ class ServingInstance {
     int port_ = 0;
 };
 
-/// A loopback port that nothing listens on.
+/// A loopback port without a listener.
 int freePort();
 
-/// Trusts the root of the service in `service` alone.
+/// Trusts only the root of the service in `service`.
 std::unique_ptr<httplib::SSLClient> clientOf(const std::string& service, int port);
 
-/// The status of the answer to GET /healthz.
+/// The status of the response to GET /healthz.
 int healthOf(const std::string& service, int port);
 
-/// Writers that change records, and clients that look them up, at once. The ticket of a record says how often
-/// it was put, so that a client can tell an older state from a newer one.
+/// Writers that change records, and clients that look them up, at the same time. A record's ticket has the
+/// number of its put, so a client can distinguish an older state from a newer one.
 class Load {
   public:
     struct Counts {
         std::size_t acknowledged = 0;
-        std::size_t refusedChanges = 0;  // by a failure that says: try again
+        std::size_t refusedChanges = 0;  // by a failure that allows a retry
         std::size_t wrongFailures = 0;   // of changes, by any other failure
         std::size_t answered = 0;
         std::size_t retriable = 0;     // lookups: no connection, or 503 with Retry-After
@@ -62,14 +62,14 @@ class Load {
         std::size_t exhausted = 0;     // lookups that failed again and again for a minute
     };
 
-    /// One writer for each store, with records of its own. Clients ask at `port`.
+    /// One writer for each store, with its own records. Clients send requests to `port`.
     Load(std::vector<RecordStore*> stores, std::string service, int port, int clients);
     ~Load();
     Load(const Load&) = delete;
     Load& operator=(const Load&) = delete;
 
-    /// Waits until so many more changes were acknowledged and so many more lookups answered. False if that
-    /// takes two minutes.
+    /// Waits for this number of further acknowledged changes, and of further successful lookups. False if
+    /// that takes two minutes.
     bool goOn(std::size_t changes, std::size_t lookups);
 
     /// Ends writers and clients.
@@ -77,14 +77,14 @@ class Load {
 
     Counts counts() const;
 
-    /// What was acknowledged and is not in the store or its log; one line each.
+    /// Acknowledged changes that are missing in the store or its log; one line each.
     std::vector<std::string> lost(RecordStore& store) const;
 
   private:
     struct Subject {
         std::string name;
         std::atomic<int> acknowledged{0};
-        std::vector<int> all;  // by its writer alone, until stop()
+        std::vector<int> all;  // only its writer uses it, until stop()
     };
 
     void write(std::size_t writer);

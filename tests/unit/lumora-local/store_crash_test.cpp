@@ -1,4 +1,4 @@
-// What is in a store after whoever was changing it was killed, at each of its system calls.
+// The contents of a store after its writer was killed, at each of its system calls.
 #include <gtest/gtest.h>
 
 #include <functional>
@@ -19,7 +19,7 @@ using test::kProduction;
 constexpr int kMoreCallsThanAChangeMakes = 5000;
 
 SignedRecord statedRecord(const std::string& name, bool revoked) {
-    Data hash = foundation::toData(name);  // each record's own: none gets around a revoked one
+    Data hash = foundation::toData(name);  // different for each record: none gets around a revoked one
     hash.resize(20);
     return {{name, "Sample.app", {{2, hash}}, revoked, false, Date{7}},
             foundation::toData(revoked ? "revoked" : "valid")};
@@ -45,7 +45,7 @@ class StoreCrashTest : public testing::TestWithParam<std::string> {
             [&] {
                 store->put(kProduction, {record}, {Date{100}, "tester", Reason::compromised, "", false});
             });
-        // A server may still be at work on a commit whose client has gone.
+        // A server may still work on a commit after its client has gone.
         kind_->open({})->holdStill([](const std::function<void()>&) {});
         return child;
     }
@@ -69,7 +69,7 @@ TEST_P(StoreCrashTest, KeepsEveryAcknowledgedIssue) {
         const bool found = store->findTicket(kProduction, name).has_value();
         EXPECT_TRUE(found || !child.acknowledged) << "lost at call " << call;
         there += found ? std::size_t{1} : std::size_t{0};
-        // A record and its event come together or not at all.
+        // A record and its event arrive together or not at all.
         ASSERT_EQ(verifyHistory(*store, std::nullopt).events, there) << "at call " << call;
         ASSERT_EQ(store->countRecords(), there) << "at call " << call;
     }

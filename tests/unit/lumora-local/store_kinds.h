@@ -1,5 +1,5 @@
-// The record stores that there are, each empty and in a place of its own, for tests that hold all of them to
-// the same.
+// All kinds of record stores, each empty and in its own place, for tests with the same requirements on all of
+// them.
 #pragma once
 
 #include <memory>

@@ -1,4 +1,4 @@
-// Several instances of the service on one database, one or the other of which is killed.
+// Several instances of the service on one database, while one of them is killed.
 #include <gtest/gtest.h>
 #include <httplib.h>
 
@@ -42,14 +42,14 @@ void expectNothingLost(const Load& load, RecordStore& store) {
                 counts.acknowledged, counts.refusedChanges, counts.answered, counts.retriable);
 }
 
-/// A service that has moved to a database of a cluster of its own.
+/// A service that has moved to a database in a new cluster.
 class Team : public testing::Test {
   protected:
     void SetUp() override {
         if (const auto reason = PostgresCluster::missing()) GTEST_SKIP() << *reason;
         cluster_ = std::make_unique<PostgresCluster>();
         std::string url = cluster_->makeDatabase();
-        // Nobody says who connects: the service has to know that also once it has given up its rights.
+        // The URL has no user: the service must know the user even after giving up its rights.
         cluster_->sql(url, "CREATE ROLE \"" + nameOfCaller() + "\" SUPERUSER LOGIN");
         url.erase(url.find("&user="));
         place_ = {.url = url, .named = "test"};
@@ -118,7 +118,7 @@ TEST_F(Team, SeesEachRevocationThroughEveryInstanceOnceItIsAcknowledged) {
     }
 }
 
-/// HAProxy with the configuration of the documents, whose addresses are those of this test.
+/// HAProxy with the documented configuration, and with this test's addresses.
 class BehindHaproxy : public Team {
   protected:
     static constexpr const char* kHaproxy = "/usr/sbin/haproxy";

@@ -1,6 +1,7 @@
 // Compiled into the programs of a ThreadSanitizer build that use the HTTP library. The library itself is not
-// instrumented: when two threads first use one of its static tables, the sanitizer sees both touch it through
-// memcpy and memcmp, and does not see the guard between them. The sanitizer calls the function by its name.
+// instrumented. When two threads first use one of its static tables, the sanitizer sees both access it
+// through memcpy and memcmp, but does not see the guard between them. The sanitizer calls the function by its
+// name.
 // NOLINTBEGIN(bugprone-reserved-identifier)
 extern "C" const char* __tsan_default_suppressions();
 

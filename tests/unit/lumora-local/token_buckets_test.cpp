@@ -60,7 +60,7 @@ TEST_F(TokenBucketsTest, ForgetTheClientThatWasQuietLongest) {
     EXPECT_FALSE(tokens.take("a"));
     EXPECT_FALSE(tokens.take("b"));
     EXPECT_TRUE(tokens.take("a"));
-    EXPECT_FALSE(tokens.take("c"));  // in the place of b
+    EXPECT_FALSE(tokens.take("c"));  // it replaces b
     EXPECT_EQ(tokens.size(), 2U);
     EXPECT_TRUE(tokens.take("a"));
     EXPECT_FALSE(tokens.take("b"));

@@ -1,5 +1,4 @@
-// Whatever call fails: what was to be written is there or is not, and nothing half made is in the way of the
-// next try.
+// Whichever call fails: the file is complete or missing, and no incomplete file prevents the next try.
 #include <gmock/gmock.h>
 
 #include <cerrno>
@@ -31,7 +30,8 @@ std::set<std::string> namesIn(const std::string& directory) {
 
 using MakeTrouble = std::function<Trouble(std::size_t number)>;
 
-/// Writes once for every call that can fail, into a directory of its own. Answers the names of those calls.
+/// Writes once for every call that can fail, each time into a new directory. Returns the names of those
+/// calls.
 std::set<std::string> failEachCall(const MakeTrouble& makeTrouble,
                                    const std::function<void(const std::string& directory)>& write,
                                    const std::set<std::string>& wanted) {
