@@ -33,7 +33,7 @@ class AdminListener {
     /// Adds the files that it reads during the run.
     void addRights(sandbox::Confinement& rights, const ServiceDirectory& directory) const;
 
-    /// Serves, with threads of its own, at most `connections` at once. `counts` must outlive them.
+    /// Serves at most `connections` at once, with its own threads. `counts` must outlive them.
     void start(int stopDescriptor, std::size_t connections, ServiceCounts& counts);
 
     /// Reads access.toml again. An unusable file leaves the list unchanged and is logged as an error.

@@ -1,5 +1,5 @@
-// Looking a service over before its clients find out: do keys, certificates, platform directory, access list
-// and store fit, and how long do the certificates last.
+// Checks a service before its clients notice a fault: whether keys, certificates, platform directory, access
+// list and store fit each other, and when the certificates expire.
 #pragma once
 
 #include <cstdint>

@@ -397,7 +397,7 @@ void Connection::onTimeout() {
 }
 
 void Connection::makeRoom() {
-    // A service that is to end lets a request finish that has begun.
+    // At the end of the service, a request that has begun is finished.
     if (phase_ != Phase::silent && (phase_ != Phase::reading || context_.stopping)) return;
     ErrorCode ignored;
     if (phase_ == Phase::silent && established_) {

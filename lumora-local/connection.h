@@ -89,8 +89,8 @@ class Connection : public std::enable_shared_from_this<Connection> {
     void limitTime(std::chrono::milliseconds time);
     void setTimer();
     void onTimeout();
-    /// For another connection of the peer, or since the service is to end. Does nothing while a request is
-    /// being answered.
+    /// For another connection of the peer, or at the end of the service. Does nothing during a
+    /// response.
     void makeRoom();
 
     boost::asio::ip::tcp::socket& socket();

@@ -1,9 +1,9 @@
 // The open connections, and the one to close if a peer has too many.
 //
-// A connection is silent while it has no request under way: before and during the handshake, and between
-// requests. It waits while a request has arrived in part. Beyond the bound a peer loses its oldest silent
-// connection, or else the one that has waited longest. So nobody keeps others at the same address out by
-// opening connections and saying nothing, or by saying half of something.
+// A connection is silent while it has no request: before and during the handshake, and between requests. It
+// waits while only a part of a request has arrived. If a peer exceeds the bound, it loses its oldest silent
+// connection, or else the one that has waited longest. So nobody at an address can keep others out by silent
+// connections or partial requests.
 #pragma once
 
 #include <cstdint>
@@ -23,9 +23,9 @@ class ConnectionTable {
     explicit ConnectionTable(std::size_t perAddress) : perAddress_(perAddress) {}
 
     /// Enters a silent connection of the peer at `address`. `close` ends the connection soon, unless it has
-    /// become busy; it is called without a lock held, from any thread, at most once, and not after leave()
+    /// become busy. It is called without a lock held, from any thread, at most once, and never after leave()
     /// has returned. If the peer has too many connections, its oldest silent one is closed, or else the one
-    /// that has waited longest; if all are busy, nothing is entered and the result is 0.
+    /// that has waited longest. If all are busy, returns 0 and enters nothing.
     Identifier enter(const std::string& address, std::function<void()> close);
 
     /// The first bytes of a request are here.
@@ -51,7 +51,7 @@ class ConnectionTable {
         State state = State::silent;
         std::function<void()> close;
     };
-    using Peer = std::list<Entry>;  // those of one state are in the order in which they came to it
+    using Peer = std::list<Entry>;  // entries of one state are in the order in which they reached it
 
     struct Place {
         std::string address;

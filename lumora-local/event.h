@@ -58,10 +58,10 @@ struct Event {
     std::string hash;
 };
 
-/// Whether a comment says nothing: there are only blanks in it.
+/// Whether a comment has only blanks.
 bool isBlank(std::string_view comment);
 
-/// What stands before the first event: 64 zeros.
+/// The previous hash of the first event: 64 zeros.
 std::string hashBeforeTheFirstEvent();
 
 /// The hash that an event with these fields has; `event.hash` plays no part. Throws Failure if the

@@ -18,8 +18,8 @@ bool announcesBody(const HttpRequest& request);
 /// Whether the client waits for an interim response before it sends the body (RFC 9110, 10.1.1).
 bool expectsContinue(const HttpRequest& request);
 
-/// For heads that no handler may see: an unknown method, a target that is too long, framing that two sides
-/// may read differently (RFC 9112, 6.3), no host or two of them.
+/// Refuses heads before any handler: an unknown method, a target that is too long, framing that two sides may
+/// read differently (RFC 9112, 6.3), no host or two hosts.
 std::optional<int> refuseHead(const HttpRequest& request);
 
 /// Refuses a request that must have a body and does not state its end.

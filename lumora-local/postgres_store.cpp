@@ -81,8 +81,8 @@ std::optional<bool> isRevoked(PostgresConnection& connection, Environment enviro
     return rows.boolean(0, 0);
 }
 
-/// The same rule as the embedded store's: a hash counts under any name and algorithm, and the other hashes of
-/// a revoked artefact count if one is to have a ticket of its own.
+/// The same rule as in the SQLite store: a hash counts under any name and algorithm. The other hashes of a
+/// revoked artefact count if one of them is to get its own ticket.
 std::optional<RevokedElsewhere> revokedBeside(PostgresConnection& connection, Environment environment,
                                               const Record& record, Deadline deadline) {
     if (record.hashes.empty()) return std::nullopt;

@@ -225,15 +225,15 @@ struct EventPage {
 /// Calls may come from any thread, several at a time. They throw Failure.
 class RecordStore : public RecordSource {
   public:
-    /// Puts all records into the store, each in the place of an earlier record of its name, and appends an
-    /// event for each, in one transaction; or changes nothing. A valid ticket for a revoked record, or for a
-    /// hash that another record has revoked, is refused (RevokedFailure), unless the occasion reinstates.
-    /// A ticket does not say of which environment it is. So what is revoked in production counts as revoked
-    /// in every environment; what is revoked in development, in development alone.
-    /// When this returns, the change survives a crash.
+    /// Puts all records into the store and appends an event for each, in one transaction; or changes
+    /// nothing. A record replaces an earlier record of its name. A valid ticket for a revoked record,
+    /// or for a hash that another record has revoked, is refused (RevokedFailure), unless the occasion
+    /// reinstates. A ticket does not name its environment. So a revocation in production counts in
+    /// every environment, and one in development only there. When this returns, the change survives a
+    /// crash.
     ///
-    /// If the occasion's request was carried out before, nothing changes, and the outcome is that of the
-    /// first time. Throws ReusedKeyFailure if its key belongs to another request. Needs one record.
+    /// If the occasion's request was carried out before, nothing changes, and the outcome is that of
+    /// the first time. Throws ReusedKeyFailure if its key belongs to another request. Needs one record.
     virtual PutOutcome put(Environment environment, const std::vector<SignedRecord>& records,
                            const Occasion& occasion) = 0;
 
@@ -277,14 +277,14 @@ struct RevokedElsewhere {
     std::string name;
 };
 
-/// What a put finds in the store.
+/// The state of the store before a put.
 struct Standing {
     std::optional<bool> revoked;                // of the record of that name; `nullopt` if there is none
     std::optional<RevokedElsewhere> elsewhere;  // only for a valid ticket
 };
 
-/// What putting `record` does. Throws RevokedFailure if it would make revoked software valid and the occasion
-/// does not reinstate.
+/// The action of putting `record`. Throws RevokedFailure if it would make revoked software valid and the
+/// occasion does not reinstate.
 Action actionOf(Environment environment, const Record& record, const Standing& before,
                 const Occasion& occasion);
 

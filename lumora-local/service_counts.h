@@ -11,7 +11,7 @@
 
 namespace pinwell::lumora {
 
-/// What a request is about, as far as its target says.
+/// The kind of a request, by its target.
 enum class RequestKind { lookup, asset, health, readiness, administration, other, unreadable };
 
 inline constexpr std::array kRequestKindNames{"lookup",         "asset", "healthz",   "readyz",

@@ -81,7 +81,7 @@ bool answerWith(int descriptor, Work&& work) {
     }
 }
 
-/// All that the child does.
+/// The whole work of the child.
 void serveToken(int descriptor, const OpenKey& open) {
     std::unique_ptr<DigestSigner> key;
     const bool sent = answerWith(descriptor, [&] {
@@ -160,8 +160,8 @@ class KeyBehindProcess final : public SigningKey {
         return bytes;
     }
 
-    /// The child ends when nothing can be asked any more. One whose token does not answer is killed, and not
-    /// waited for: a device driver may hold it.
+    /// The child ends when its socket is closed. A child whose token does not respond is killed and not
+    /// waited for, because a device driver may block it.
     void end() {
         const bool answers = static_cast<bool>(ours_);
         ours_.reset();

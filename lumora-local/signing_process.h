@@ -10,7 +10,7 @@
 
 namespace pinwell::lumora {
 
-/// A key on P-256 as the child holds it. One thread at a time.
+/// A key on P-256 in the child. One thread at a time.
 class DigestSigner {
   public:
     virtual ~DigestSigner() = default;
@@ -22,14 +22,14 @@ class DigestSigner {
     virtual foundation::Data signDigest(foundation::ByteView digest) const = 0;
 };
 
-/// How long a signature may take. To open a token may take its owner longer.
+/// The time limit of a signature. Opening a token may take its owner longer.
 inline constexpr std::chrono::milliseconds kSigningPatience{30'000};
 
-/// Starts a child, which calls `open` and signs until the result is destroyed. Throws what `open` throws, if
-/// that is a Failure; its exit status and text come over from the child.
+/// Starts a child, which calls `open` and signs until the result is destroyed. Throws an exception of `open`
+/// if it is a Failure; its exit status and text come from the child.
 ///
-/// sign() throws Failure (EX_IOERR) if the child has ended, or does not answer in time. Nothing is asked of
-/// it after that, and the end does not wait for it.
+/// sign() throws Failure (EX_IOERR) if the child has ended or does not respond in time. After that it sends
+/// no more questions, and the destructor does not wait for the child.
 std::unique_ptr<SigningKey> startSigningProcess(const std::function<std::unique_ptr<DigestSigner>()>& open,
                                                 std::chrono::milliseconds patience = kSigningPatience);
 

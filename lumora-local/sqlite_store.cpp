@@ -71,10 +71,10 @@ std::optional<bool> isRevoked(SQLite::Database& database, Environment environmen
     return row.getColumn(0).getInt() != 0;
 }
 
-/// A revoked record that a valid ticket for `record` would get around, although it is another one; `nullopt`
-/// if there is none. Whoever checks a ticket compares the bytes of a hash and not its algorithm, so the same
-/// hash under another name counts; so do the other hashes of a revoked artefact, if one is to have a ticket
-/// of its own. What two artefacts merely hold in common, nested code for instance, does not.
+/// A revoked record, other than `record`, that a valid ticket for `record` would get around; `nullopt` if
+/// there is none. Clients compare the bytes of a hash and not its algorithm, so the same hash under another
+/// name counts. The other hashes of a revoked artefact count if one of them is to get its own ticket. Hashes
+/// that two artefacts merely share, such as nested code, do not.
 std::optional<RevokedElsewhere> revokedBeside(SQLite::Database& database, Environment environment,
                                               const Record& record) {
     SQLite::Statement row(database,

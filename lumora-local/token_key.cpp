@@ -51,7 +51,7 @@ UriHandle parseUri(const std::string& text) {
     return uri;
 }
 
-/// The libraries that are asked, for as long as this is there.
+/// The loaded libraries, during the life of this object.
 class Modules {
   public:
     explicit Modules(const std::string& uri, const char* path) {
@@ -141,7 +141,7 @@ Data publicKeyOf(const std::string& uri, Data point) {
     return encodeDer<const EVP_PKEY>(i2d_PUBKEY, key.get(), "encode a public key");
 }
 
-/// An open session with the token, and where the key is in it.
+/// An open session with the token, and the place of the key in it.
 struct Session {
     explicit Session(const std::string& text)
         : name(text.substr(0, text.find('?'))),

@@ -1,4 +1,4 @@
-// In the place of token_key.cpp in a build without PKCS #11.
+// Replaces token_key.cpp in a build without PKCS #11.
 #include "foundation/format.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/token_key.h"

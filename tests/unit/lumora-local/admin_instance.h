@@ -65,8 +65,8 @@ class ServiceWithClients {
 /// `serve` with both listeners on free loopback ports, until the test ends.
 class AdminInstance {
   public:
-    /// `authorities` is in the place of the service's own, unless it is empty; `options` are further ones of
-    /// the command. Throws std::runtime_error if it does not start.
+    /// `authorities`, unless empty, replaces the service's own; `options` are further options of the
+    /// command. Throws std::runtime_error if it does not start.
     explicit AdminInstance(const ServiceWithClients& service, const std::string& authorities = "",
                            const std::vector<std::string>& options = {});
 

@@ -66,7 +66,7 @@ TEST(TicketBody, IsRefusedIfAMemberIsMissingUnknownOrOfAnotherType) {
     }
 }
 
-/// Whoever checks a request on its way may read the other one.
+/// Another reader of the request, such as a filter, may use the other one.
 TEST(TicketBody, HasEachMemberOnce) {
     EXPECT_EQ(ticketStatus(with(R"("label":"a","label":"b")")), 400);
     EXPECT_EQ(ticketStatus(with(R"("label":"a","\u006cabel":"b")")), 400);

@@ -291,7 +291,7 @@ TEST_P(RecordStoreTest, RefusesItAlsoIfTheRevocationComesFromAnotherConnection) 
     EXPECT_THROW(store.put(kProduction, {makeRecord("a", "ticket")}, kOccasion), Failure);
 }
 
-/// A ticket is as genuine to a client of the one environment as to a client of the other.
+/// Clients of both environments accept a ticket of either.
 TEST_P(RecordStoreTest, RefusesATicketOfDevelopmentForWhatIsRevokedInProduction) {
     RecordStore& store = openAndKeep();
     SignedRecord revoked = listing("2/2/a", {1, 2});

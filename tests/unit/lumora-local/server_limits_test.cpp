@@ -1,5 +1,5 @@
-// What the server does when its limits are reached: it runs here, in this process, with limits small enough
-// to reach.
+// The server at its limits: it runs in this process, with limits that are small enough to
+// reach.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <netinet/in.h>
@@ -212,7 +212,7 @@ TEST(SilentConnections, DoNotHoldUpTheStop) {
     EXPECT_TRUE(silent.isClosed(0));
 }
 
-/// A client whose request has arrived but for its body.
+/// A client whose request has arrived except its body.
 class HalfSentRequest {
   public:
     explicit HalfSentRequest(int port) : client_(port) {

@@ -1,4 +1,4 @@
-// The process that speaks to a token, with tokens that misbehave in its place.
+// The process that uses a token, with misbehaving tokens.
 #include "lumora-local/signing_process.h"
 
 #include <gtest/gtest.h>
@@ -36,7 +36,7 @@ std::unique_ptr<SigningKey> keyWith(void (*mishap)(const Data& digest),
     return startSigningProcess([mishap] { return std::make_unique<FakeToken>(mishap); }, patience);
 }
 
-/// What sign() says as it fails.
+/// The text of the failure of sign().
 std::string failureOf(const SigningKey& key, std::string_view message = "message") {
     try {
         key.sign(foundation::asBytes(message));
@@ -76,7 +76,7 @@ TEST(SigningProcess, PassesOnWhyTheKeyCannotBeOpened) {
 TEST(SigningProcess, GivesUpATokenThatDoesNotAnswer) {
     auto key = keyWith([](const Data&) { ::pause(); }, milliseconds(50));
     EXPECT_EQ(failureOf(*key), kGone);
-    // An answer that comes later is not taken for that of another message.
+    // A late answer is not mistaken for the answer to another message.
     EXPECT_EQ(failureOf(*key), kGone);
     key.reset();  // does not wait for the child either
 }
