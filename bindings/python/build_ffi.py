@@ -1,7 +1,7 @@
 """Takes the declarations of the C interface from its header, for CFFI in ABI mode.
 
 ABI mode: the package is plain Python, one wheel for every version of the interpreter and every machine, and needs
-neither a compiler nor the library to be built. That is safe with this interface: its structures state their sizes, its
+neither a compiler nor the library for a build. This is safe with this interface: its structures state their sizes, its
 handles are opaque, and everything else is a function. The declarations are read from the header itself, so they cannot
 differ from it.
 """
@@ -15,7 +15,7 @@ HEADER = pathlib.Path(__file__).resolve().parents[2] / "library" / "include" / "
 
 
 def declarations(header: str) -> str:
-    """What is left of the header without comments, directives and attributes."""
+    """The header without comments, directives and attributes."""
     text = re.sub(r"/\*.*?\*/", "", header, flags=re.DOTALL)
     text = re.sub(r"#(?:[^\n]*\\\n)*[^\n]*", "", text)
     # Only the C++ compiler sees these braces.

@@ -1,4 +1,4 @@
-"""Builds the package. What is fixed stands in pyproject.toml."""
+"""Builds the package. The fixed settings are in pyproject.toml."""
 
 import pathlib
 import re

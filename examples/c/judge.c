@@ -1,7 +1,7 @@
-/* judge PLATFORM PATH...: what libpinwell-ticket says of each artefact, a JSON object on a line of its own.
+/* judge PLATFORM PATH...: prints libpinwell-ticket's results for each artefact, one JSON object a line.
  *
- * PLATFORM is a platform directory, such as /etc/pinwell/platform. Ends with 0 if all artefacts are as they were signed
- * and have a good ticket, with 65 if one has not, with 64 or 70 if something else is wrong.
+ * PLATFORM is a platform directory, such as /etc/pinwell/platform. Ends with 0 if all artefacts are unchanged since
+ * signing and have a good ticket, with 65 if not, and with 64 or 70 after another error.
  *
  *   cc -std=c99 judge.c $(pkg-config --cflags --libs pinwell-ticket) -o judge
  */

@@ -1,6 +1,6 @@
-// judge PLATFORM PATH...: what libpinwell-ticket says of each artefact, a JSON object on a line of its own.
+// judge PLATFORM PATH...: prints libpinwell-ticket's results for each artefact, one JSON object a line.
 //
-// Ends with 0 if all artefacts are as they were signed and have a good ticket, with 65 if one has not.
+// Ends with 0 if all artefacts are unchanged since signing and have a good ticket, with 65 if not.
 //
 //	go build
 package main

@@ -1,5 +1,5 @@
 /* The C interface of libpinwell-ticket for Node.js, over Node-API: one binary for every version of Node.js from 12 on.
- * Results are copied into objects, so that no handle stays open but that of the roots, which the collector frees.
+ * Results are copied into objects. So only the handle of the roots stays open, and the collector frees it.
  */
 #define NAPI_VERSION 6
 #include <node_api.h>

@@ -1,6 +1,6 @@
-//! judge PLATFORM PATH...: what libpinwell-ticket says of each artefact, a JSON object on a line of its own.
+//! judge PLATFORM PATH...: prints libpinwell-ticket's results for each artefact, one JSON object a line.
 //!
-//! Ends with 0 if all artefacts are as they were signed and have a good ticket, with 65 if one has not.
+//! Ends with 0 if all artefacts are unchanged since signing and have a good ticket, with 65 if not.
 
 use std::env;
 use std::ffi::{OsStr, OsString};
@@ -12,7 +12,7 @@ mod pinwell;
 
 use pinwell::{Error, Roots, Verdict};
 
-/// Bytes as a JSON text. Those that are not ASCII are shown as if they were Latin-1: they need not be UTF-8.
+/// Bytes as a JSON text. Bytes outside ASCII are shown as Latin-1, because they need not be UTF-8.
 fn quoted(text: &OsStr) -> String {
     let mut out = String::from("\"");
     for &byte in text.as_bytes() {

@@ -1,6 +1,6 @@
-//! Judges software that carries a Pinwell ticket, and holds its bytes against what was signed.
+//! Judges software with a Pinwell ticket, and checks its bytes against its signature.
 //!
-//! The declarations below are those of <pinwell/ticket_c.h>; on top of them is what is safe to call. Everything may be
+//! The declarations below are the same as in <pinwell/ticket_c.h>; the safe functions use them. All functions may be
 //! called from several threads at once.
 
 use std::ffi::{CStr, OsStr, OsString};
@@ -109,7 +109,7 @@ mod sys {
     }
 }
 
-/// Why a call failed. What is wrong with an artefact is no error of `judge` and `verify`: it is their verdict.
+/// The reason of a failed call. A fault of an artefact is not an error of `judge` and `verify`, but their verdict.
 #[derive(Debug)]
 pub struct Error {
     pub status: i32,
@@ -124,14 +124,14 @@ impl fmt::Display for Error {
 
 impl std::error::Error for Error {}
 
-/// Certificates that a ticket's chain may end in.
+/// The certificates at which a ticket's chain may end.
 pub struct Roots(*mut sys::pinwell_roots);
 
-// The library takes a handle from any thread.
+// The library accepts a handle from any thread.
 unsafe impl Send for Roots {}
 unsafe impl Sync for Roots {}
 
-/// One question that was asked about an artefact. The place need not be UTF-8.
+/// One check of an artefact. The place need not be UTF-8.
 pub struct Check {
     pub name: String,
     pub place: OsString,
@@ -139,13 +139,13 @@ pub struct Check {
 }
 
 impl Check {
-    /// Whether it speaks against the artefact.
+    /// Whether the check counts as failed.
     pub fn is_fault(&self) -> bool {
         !matches!(self.outcome, "passed" | "skipped" | "noted")
     }
 }
 
-/// A verdict, its reason, and all that was asked on the way.
+/// A verdict, its reason, and all checks.
 pub struct Verdict {
     pub kind: &'static str,
     pub verdict: &'static str,
@@ -156,13 +156,13 @@ pub struct Verdict {
 }
 
 impl Verdict {
-    /// Whether all that was asked is as it should be.
+    /// Whether the verdict is good.
     pub fn is_good(&self) -> bool {
         self.verdict == "good"
     }
 }
 
-/// A ticket that was found, and its place.
+/// A found ticket, and its place.
 pub struct Ticket {
     pub data: Vec<u8>,
     pub file: PathBuf,
@@ -193,7 +193,7 @@ fn word(text: *const c_char) -> &'static str {
     unsafe { CStr::from_ptr(text) }.to_str().unwrap_or("none")
 }
 
-/// The bytes that a handle hands out, copied: they are good until it is freed.
+/// A copy of a handle's bytes, which are valid only until the handle is freed.
 unsafe fn bytes(pointer: *const u8, length: usize) -> Vec<u8> {
     if pointer.is_null() {
         return Vec::new();
@@ -220,7 +220,7 @@ impl Roots {
         Ok(Roots(handle))
     }
 
-    /// How many certificates a chain may end in.
+    /// The number of certificates.
     pub fn count(&self) -> usize {
         unsafe { sys::pinwell_roots_count(self.0) }
     }
@@ -232,12 +232,12 @@ impl Drop for Roots {
     }
 }
 
-/// Judges the ticket that is attached to an artefact, and does not look at its bytes.
+/// Judges the attached ticket of an artefact, without checking its bytes.
 pub fn judge(path: &Path, roots: &Roots) -> Result<Verdict, Error> {
     assess(sys::pinwell_judge_file, path, roots)
 }
 
-/// Judges the ticket, and holds every byte of the artefact against what was signed.
+/// Judges the ticket, and checks every byte of the artefact against the signature.
 pub fn verify(path: &Path, roots: &Roots) -> Result<Verdict, Error> {
     assess(sys::pinwell_verify_file, path, roots)
 }

@@ -21,7 +21,7 @@ ALL = json.loads((VECTORS / "vectors.json").read_text())["vectors"]
 
 
 class Artefacts:
-    """Where the vectors' artefacts are, by the vectors' names."""
+    """The paths of the vectors' artefacts, by the vectors' names."""
 
     def __init__(self, folder: pathlib.Path) -> None:
         self.paths = {

@@ -1,4 +1,4 @@
-"""What the package makes of arguments that are wrong, and what it leaves behind."""
+"""Wrong arguments, and the release of memory and handles."""
 
 from __future__ import annotations
 
@@ -162,7 +162,7 @@ def test_roots_may_be_closed_by_one_thread_while_another_judges(application: pat
         assert len(seen) == 4 and set(seen) <= {pinwell.Verdict.GOOD, "closed"}
 
 
-# What is left behind.
+# Memory and handles.
 
 
 def test_leaves_no_descriptor_open(artefacts: Artefacts, roots: pinwell.Roots) -> None:

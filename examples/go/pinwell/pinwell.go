@@ -1,6 +1,6 @@
-// Package pinwell judges software that carries a Pinwell ticket, and holds its bytes against what was signed.
+// Package pinwell judges software with a Pinwell ticket, and checks its bytes against its signature.
 //
-// It calls libpinwell-ticket, which pkg-config has to find. All functions may be called from several goroutines at once.
+// It calls libpinwell-ticket, which pkg-config must find. All functions may be called from several goroutines at once.
 package pinwell
 
 /*
@@ -16,7 +16,7 @@ import (
 	"unsafe"
 )
 
-// Error says why a call failed. What is wrong with an artefact is no error of Judge and Verify: it is their verdict.
+// Error is the reason of a failed call. A fault of an artefact is not an error of Judge and Verify, but their verdict.
 type Error struct {
 	Status  int
 	Offset  uint64
@@ -25,31 +25,31 @@ type Error struct {
 
 func (e *Error) Error() string { return "pinwell: " + e.Message }
 
-// Roots are certificates that a ticket's chain may end in.
+// Roots are the certificates at which a ticket's chain may end.
 type Roots struct{ handle *C.pinwell_roots }
 
-// Check is one question that was asked about an artefact.
+// Check is one check of an artefact.
 type Check struct {
 	Name, Place, Outcome, Expected, Found string
 	Depth                                 int
 }
 
-// IsFault says whether the check speaks against the artefact.
+// IsFault reports whether the check counts as failed.
 func (c Check) IsFault() bool {
 	return c.Outcome != "passed" && c.Outcome != "skipped" && c.Outcome != "noted"
 }
 
-// Result is a verdict, its reason, and all that was asked on the way. Texts from an artefact need not be UTF-8.
+// Result is a verdict, its reason, and all checks. Texts from an artefact need not be UTF-8.
 type Result struct {
 	Kind, Verdict, Reason, RecordName string
 	ExitStatus                        int
 	Checks                            []Check
 }
 
-// IsGood says whether all that was asked is as it should be.
+// IsGood reports whether the verdict is good.
 func (r *Result) IsGood() bool { return r.Verdict == "good" }
 
-// Ticket is a ticket that was found, and its place.
+// Ticket is a found ticket, and its place.
 type Ticket struct {
 	Data   []byte
 	File   string
@@ -69,7 +69,7 @@ func check(status C.pinwell_status, e *C.pinwell_error) error {
 	return &Error{int(status), uint64(e.offset), C.GoString(&e.message[0])}
 }
 
-// A path goes over with its length, so that a zero byte in it is found out.
+// A path is passed with its length, so that a zero byte in it is detected.
 func withPath(path string, call func(*C.char, C.size_t) C.pinwell_status) C.pinwell_status {
 	bytes := C.CBytes(append([]byte(path), 0))
 	defer C.free(bytes)
@@ -93,19 +93,19 @@ func RootsFromDirectory(path string) (*Roots, error) {
 	return roots, nil
 }
 
-// Count says how many certificates a chain may end in.
+// Count returns the number of certificates.
 func (r *Roots) Count() int {
 	defer runtime.KeepAlive(r)
 	return int(C.pinwell_roots_count(r.handle))
 }
 
-// Close lets go of the certificates. It may be called again.
+// Close frees the certificates. It may be called again.
 func (r *Roots) Close() {
 	C.pinwell_roots_free(r.handle)
 	r.handle = nil
 }
 
-// Judge judges the ticket that is attached to an artefact, and does not look at its bytes.
+// Judge judges the attached ticket of an artefact, without checking its bytes.
 func Judge(path string, roots *Roots) (*Result, error) {
 	defer runtime.KeepAlive(roots)
 	var handle *C.pinwell_result
@@ -116,7 +116,7 @@ func Judge(path string, roots *Roots) (*Result, error) {
 	return result(handle), check(status, &e)
 }
 
-// Verify judges the ticket, and holds every byte of the artefact against what was signed.
+// Verify judges the ticket, and checks every byte of the artefact against the signature.
 func Verify(path string, roots *Roots) (*Result, error) {
 	defer runtime.KeepAlive(roots)
 	var handle *C.pinwell_result
@@ -160,7 +160,7 @@ func result(handle *C.pinwell_result) *Result {
 	return r
 }
 
-// FindTicket finds the ticket that is attached to an artefact. Whether it is genuine is not asked.
+// FindTicket finds the attached ticket of an artefact, without judging it.
 func FindTicket(path string) (*Ticket, error) {
 	var handle *C.pinwell_ticket
 	e := newError()

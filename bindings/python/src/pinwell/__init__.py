@@ -1,4 +1,4 @@
-"""Judges software that carries a Pinwell ticket, and holds its bytes against what was signed.
+"""Judges software with a Pinwell ticket, and checks its bytes against its signature.
 
     import pinwell
 
@@ -8,18 +8,18 @@
             ...
         print(result.reason)
 
-Four questions, all of them answered on this machine alone:
+Four functions, which all work without a network:
 
-judge()        what `pinwell validate` says before it asks the record service
-verify()       that, and whether every byte still is what was signed: what `pinwell-gate --offline` says
+judge()        the verdict of `pinwell validate` before it contacts the record service
+verify()       the same, with a check of every byte: the verdict of `pinwell-gate --offline`
 find_ticket()  the ticket that is attached to an artefact, and its place
-record_name()  the name of the record that holds an artefact's ticket
+record_name()  the name of the record with an artefact's ticket
 
-Paths are those of open(): text, bytes, or objects with __fspath__. What is wrong with an artefact is no exception of
-judge() and verify(): it is their verdict. Texts that come from an artefact may hold any character, and bytes that are
-not UTF-8 as lone surrogates (see os.fsdecode()): show them with ascii() or repr().
+Paths are the same as for open(): text, bytes, or objects with __fspath__. A fault of an artefact is not an exception of
+judge() and verify(), but their verdict. Texts from an artefact may have any character. Bytes that are not UTF-8 become
+lone surrogates (see os.fsdecode()): print them with ascii() or repr().
 
-Everything may be called from several threads at once; the interpreter's lock is not held meanwhile.
+All functions may be called from several threads at once; they release the interpreter's lock.
 """
 
 from ._api import find_ticket, judge, record_name, record_name_for_hash, verify

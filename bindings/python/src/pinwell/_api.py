@@ -1,4 +1,4 @@
-"""The four questions."""
+"""The four functions."""
 
 from __future__ import annotations
 
@@ -16,11 +16,11 @@ _RECORD_NAME_SIZE = 144
 
 
 def judge(path: PathLike, roots: Roots, *, evaluation_time: datetime | None = None) -> Result:
-    """Judges the ticket that is attached to an artefact: what `pinwell validate` says before it asks the service.
+    """Judges the attached ticket of an artefact, like `pinwell validate` before it contacts the service.
 
-    The verdict holds for the hash that the artefact's signature states, and not for each of its bytes: see verify().
+    The verdict is about the hash that the artefact's signature states, not about each byte: see verify().
 
-    `evaluation_time`, now unless given, matters only to a policy that asks for it, which the library's own does not.
+    `evaluation_time` (default: now) is only for a policy that uses it; the library's own policy does not.
     Raises ValueError for a path with a zero byte, and for roots that were closed.
     """
     return _assess(lib.pinwell_judge_file, path, roots, evaluation_time, 0)
@@ -29,16 +29,15 @@ def judge(path: PathLike, roots: Roots, *, evaluation_time: datetime | None = No
 def verify(
     path: PathLike, roots: Roots, *, evaluation_time: datetime | None = None, threads: int = 0
 ) -> Result:
-    """Judges the ticket, and holds every byte against what was signed: what `pinwell-gate --offline` says.
+    """Judges the ticket, and checks every byte against the signature, like `pinwell-gate --offline`.
 
-    Every byte is read once, by as many threads as there are processors unless `threads` says otherwise. The rest is as
-    for judge().
+    Every byte is read once, by `threads` threads (default: one for each processor). Otherwise like judge().
     """
     return _assess(lib.pinwell_verify_file, path, roots, evaluation_time, threads)
 
 
 def find_ticket(path: PathLike) -> FoundTicket | None:
-    """Finds the ticket that is attached to an artefact; None if there is none.
+    """Finds the attached ticket of an artefact; returns None if there is none.
 
     Raises OSError, UnsupportedError or MalformedError if the artefact cannot be read.
     """
@@ -59,7 +58,7 @@ def find_ticket(path: PathLike) -> FoundTicket | None:
 
 
 def record_name(path: PathLike) -> str:
-    """The name of the record that holds an artefact's ticket, such as "2/2/" and 40 hexadecimal digits.
+    """The name of the record with an artefact's ticket, such as "2/2/" and 40 hexadecimal digits.
 
     Raises NotSignedError without a valid signature; OSError or UnsupportedError if the artefact cannot be read.
     """
@@ -70,7 +69,7 @@ def record_name(path: PathLike) -> str:
 
 
 def record_name_for_hash(digest_type: int, code_hash: bytes) -> str:
-    """The name of the record that holds the ticket for a hash. Raises ValueError if no hash has this length."""
+    """The name of the record with the ticket for a hash. Raises ValueError if no hash has this length."""
     raw = bytes(code_hash)
     if not 0 <= digest_type < 2**32:
         raise ValueError("no digest type has this number")

@@ -1,4 +1,4 @@
-"""What can go wrong beside a verdict."""
+"""Errors beside a verdict."""
 
 from __future__ import annotations
 
@@ -10,15 +10,15 @@ from ._library import PathLike, lib
 
 
 class Error(Exception):
-    """A call failed. The text says why, in one line."""
+    """A call failed. The text gives the reason in one line."""
 
 
 class UnreadableError(Error):
-    """The file cannot be read, and the system gives no errno for it; else an OSError is raised."""
+    """The file cannot be read, and the system gives no errno; with an errno, OSError is raised instead."""
 
 
 class UnsupportedError(Error):
-    """The file is of no kind that carries a ticket."""
+    """The file is of no kind that can have a ticket."""
 
 
 class MalformedError(Error):
@@ -26,7 +26,7 @@ class MalformedError(Error):
 
     def __init__(self, message: str, offset: int) -> None:
         super().__init__(message)
-        #: Where in the file the part begins that breaks the rule, in bytes.
+        #: The offset of the part that breaks the rule, in bytes.
         self.offset = offset
 
 
@@ -35,7 +35,7 @@ class NotSignedError(Error):
 
 
 class NoCertificatesError(Error):
-    """What was given as roots is no certificate."""
+    """The given roots are not certificates."""
 
 
 def new_error() -> Any:
@@ -46,7 +46,7 @@ def new_error() -> Any:
 
 
 def check(status: int, error: Any = None, path: PathLike | None = None) -> None:
-    """Raises what a status stands for, unless it is PINWELL_OK."""
+    """Raises the exception of a status, unless it is PINWELL_OK."""
     if status == lib.PINWELL_OK:
         return
     message = ffi.string(error.message if error is not None else lib.pinwell_error_text(status))
@@ -55,7 +55,7 @@ def check(status: int, error: Any = None, path: PathLike | None = None) -> None:
 
 def _exception(status: int, message: str, error: Any, path: PathLike | None) -> Exception:
     if status == lib.PINWELL_ERROR_UNREADABLE and error is not None and error.system_error != 0:
-        # As open() would: FileNotFoundError, PermissionError and so on.
+        # Like open(): FileNotFoundError, PermissionError and so on.
         number = error.system_error
         return OSError(number, os.strerror(number), path)
     if status == lib.PINWELL_ERROR_MALFORMED:

@@ -1,4 +1,4 @@
-"""The shared library, and its texts and bytes as Python's."""
+"""The shared library, and its texts and bytes as Python objects."""
 
 from __future__ import annotations
 
@@ -28,23 +28,23 @@ lib: Any = _load()
 
 
 def path_bytes(path: PathLike) -> bytes:
-    """A path as the system has it."""
+    """A path in the system's bytes."""
     return os.fsencode(path)
 
 
 def text(pointer: Any, length: int) -> str:
-    """A text from the library, whatever bytes are in it."""
+    """A text from the library, with any bytes."""
     return "" if pointer == ffi.NULL else os.fsdecode(bytes(ffi.buffer(pointer, length)))
 
 
 def text_of(function: Any, handle: Any) -> str:
-    """What a function hands out as a text."""
+    """The result of a function as a text."""
     length = ffi.new("size_t *")
     return text(function(handle, length), length[0])
 
 
 def bytes_of(function: Any, handle: Any) -> bytes | None:
-    """What a function hands out as bytes."""
+    """The result of a function as bytes."""
     length = ffi.new("size_t *")
     pointer = function(handle, length)
     return None if pointer == ffi.NULL else bytes(ffi.buffer(pointer, length[0]))

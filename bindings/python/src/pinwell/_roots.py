@@ -1,4 +1,4 @@
-"""Whom to trust."""
+"""The trusted certificates."""
 
 from __future__ import annotations
 
@@ -12,9 +12,9 @@ from ._library import PathLike, lib, path_bytes, text
 
 
 class Roots:
-    """Certificates that a ticket's chain may end in. Immutable; to be used by any number of threads.
+    """The certificates at which a ticket's chain may end. Immutable; for any number of threads.
 
-    A context manager. Closing is good manners and not necessary: nothing stays behind when the object is gone.
+    A context manager. Closing is optional: the object's end frees everything.
     """
 
     def __init__(self, handle: Any) -> None:
@@ -24,10 +24,10 @@ class Roots:
 
     @classmethod
     def from_directory(cls, path: PathLike) -> Roots:
-        """What pinwell(1) trusts if $PINWELL_PLATFORM names this directory: its roots/ and user-trust/deny/.
+        """The trust of pinwell(1) if $PINWELL_PLATFORM names this directory: its roots/ and user-trust/deny/.
 
-        Read now, once. A file that cannot be read counts for nothing, and a directory that does not exist for an empty
-        one: see len() and problems.
+        Reads the directory once, now. An unreadable file is ignored, and a missing directory counts as empty: see
+        len() and problems.
         """
         raw = path_bytes(path)
         place, error = ffi.new("pinwell_roots **"), new_error()
@@ -36,19 +36,19 @@ class Roots:
 
     @classmethod
     def from_certificates(cls, certificates: bytes) -> Roots:
-        """The certificates of a PEM text, or one certificate in DER. Raises NoCertificatesError if they are none."""
+        """The certificates of a PEM text, or one certificate in DER. Otherwise raises NoCertificatesError."""
         place, error = ffi.new("pinwell_roots **"), new_error()
         raw = bytes(certificates)
         check(lib.pinwell_roots_from_certificates(raw, len(raw), place, error), error)
         return cls(place[0])
 
     def __len__(self) -> int:
-        """How many certificates a chain may end in. Without any, no ticket is genuine."""
+        """The number of certificates. Without any, no ticket is genuine."""
         return int(lib.pinwell_roots_count(self._handle))
 
     @property
     def problems(self) -> tuple[str, ...]:
-        """A line for each file of the directory that was left out."""
+        """A line for each ignored file of the directory."""
         lines = []
         length = ffi.new("size_t *")
         for index in range(lib.pinwell_roots_problem_count(self._handle)):
@@ -56,7 +56,7 @@ class Roots:
         return tuple(lines)
 
     def close(self) -> None:
-        """Lets go of the certificates. Whoever judges by them afterwards gets a ValueError. May be called again."""
+        """Frees the certificates. Judging by them afterwards raises ValueError. May be called again."""
         self._close()
 
     def __enter__(self) -> Roots:
