@@ -9,7 +9,6 @@
 #include "foundation/places.h"
 #include "foundation/url.h"
 #include "gate/policy.h"
-#include "inspect/gather_ticket.h"
 #include "src/ticket_record.h"
 #include "verify/artefact_kind.h"
 #include "verify/check_names.h"
@@ -27,14 +26,6 @@ namespace {
 
 const std::string kStapledPlace = "stapled ticket";
 const std::string kServicePlace = "ticket of the record service";
-
-JudgedTicket judge(foundation::ByteView bytes, trust::TrustService& trust) {
-    return {bytes, trust, [&] {
-                const auto fault =
-                    inspect::firstFaultOf(inspect::gatherTicket(bytes, std::nullopt, std::nullopt, trust));
-                return fault ? fault->rule : "it is refused";
-            }};
-}
 
 }  // namespace
 
@@ -86,6 +77,7 @@ bool Case::open() {
 }
 
 bool Case::judgeStapled() {
+    placeFault_ = explainTicketPlace(*file_, judgement_.platform.files);
     // The tool stops here: such a file has no hash and no ticket.
     if (file_->appropriateExitCode() != kExitOK) return false;
     codeHash_ = file_->cdHash();
@@ -95,9 +87,9 @@ bool Case::judgeStapled() {
         result_.recordName = recordNameForHash(result_.digestType, *codeHash_);
     }
     const std::optional<foundation::Data> bytes = file_->ticketData();
-    if (!bytes) return false;
+    if (!bytes || placeFault_) return false;
     result_.checks.pass(verify::kTicketStapled, kStapledPlace, "a ticket");
-    stapled_ = judge(*bytes, judgement_.platform.trust);
+    stapled_.emplace(*bytes, judgement_.platform.trust);
     const bool isAcceptable = checkTicket(*stapled_, codeHash_, kStapledPlace, result_.checks);
     if (stapled_->isGenuine() && stapled_->isRevoked())
         atLeast(Verdict::revoked, "Its ticket revokes it: it must not run.");
@@ -186,7 +178,7 @@ void Case::takeFetched(const retrieval::FetchedTicket& fetched) {
 }
 
 void Case::takeCurrent(foundation::ByteView bytes, const std::string& place) {
-    current_ = judge(bytes, judgement_.platform.trust);
+    current_.emplace(bytes, judgement_.platform.trust);
     const bool isAcceptable = checkTicket(*current_, codeHash_, place, result_.checks);
     if (isAcceptable) {
         result_.checks.pass(verify::kTicketCurrent, place, "a ticket that accepts the artefact");
@@ -220,12 +212,12 @@ Result Case::conclude() && {
     if (result_.kind.empty() || (!codeHash_ && !stapled_ && hasCode_ && !code_.isSigned))
         return std::move(result_);
     if (!stapled_) {
-        result_.checks.checks.insert(
-            result_.checks.checks.begin(),
-            {std::string(verify::kTicketStapled), kStapledPlace, Outcome::failed, "a ticket",
-             kind_ == Kind::executable ? "none: an executable outside a bundle has no place for one"
-                                       : "none"});
-        atLeast(Verdict::noTicket, "No ticket is stapled to it.");
+        verify::Section missing;
+        verify::checkMissingTicket(placeFault_, kStapledPlace, missing);
+        result_.checks.checks.insert(result_.checks.checks.begin(), std::move(missing.checks.front()));
+        const bool isDamaged = placeFault_ && !placeFault_->isAbsence;
+        atLeast(isDamaged ? Verdict::refused : Verdict::noTicket,
+                verify::conclusionWithoutTicket(placeFault_));
     }
     if (!isStapledAcceptable_ && judgement_.options.tickets == Options::Tickets::online)
         result_.checks.skip(verify::kTicketCurrent, kServicePlace,

@@ -16,6 +16,7 @@
 #include "gate/ticket_directory.h"
 #include "retrieval/ticket_fetch.h"
 #include "src/PWHashedFile/PWHashedFile.h"
+#include "src/PWHashedFile/ticket_place.h"
 #include "src/platform.h"
 #include "verify/judged_ticket.h"
 #include "verify/verify.h"
@@ -71,6 +72,7 @@ class Case {
     verify::Kind kind_ = verify::Kind::bundle;
     std::string absolutePath_;
     std::optional<foundation::Data> codeHash_;
+    std::optional<TicketPlaceFault> placeFault_;
     std::optional<verify::JudgedTicket> stapled_;
     std::optional<verify::JudgedTicket> current_;  // from the service, or from the directory
     bool isStapledAcceptable_ = false;

@@ -13,6 +13,7 @@
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "src/PWHashedFile/file_kind.h"
+#include "src/PWHashedFile/held_ticket.h"
 #include "src/PWHashedFile/package_trailer.h"
 #include "src/PWHashedFile/trailer_window.h"
 #include "src/ticket_record.h"
@@ -41,10 +42,10 @@ void setHash(PWHashedFile& file, Report& report) {
     report.recordName = recordNameForHash(report.codeHash->algorithm, *hash);
 }
 
-/// Whether an invalid record looks like a damaged one.
-bool isDamagedRecord(const trailer_header& record) {
-    const bool knownType = record.type() == kTerminatorTrailerType || record.type() == kTicketTrailerType;
-    return record.magic() == kTerminatorTrailer.magic() || (record.version() == kTrailerVersion && knownType);
+/// The fault of a place, as the report shows it.
+std::optional<Fault> faultOf(const std::optional<TicketPlaceFault>& fault) {
+    if (!fault) return std::nullopt;
+    return Fault{fault->rule, std::nullopt, fault->offset};
 }
 
 /// Walks a package's trailers, past the first ticket and past damaged records, to the terminator.
@@ -64,6 +65,13 @@ class TrailerWalk {
     /// The first ticket from the end; only this one counts.
     const std::optional<Range>& ticket() const { return ticket_; }
 
+    /// As explainTicketPlace() would find it, which collects the trailers too.
+    std::optional<TicketPlaceFault> fault() const {
+        if (fault_ || !ticket_) return fault_;
+        const auto fault = faultOfTicketLength(ticket_->length, ticket_->offset);
+        return fault ? std::optional(TicketPlaceFault{fault->rule, fault->offset}) : std::nullopt;
+    }
+
   private:
     std::optional<std::uint64_t> step(std::uint64_t position) {
         const std::uint64_t recordOffset = position - kTrailerSize;
@@ -77,11 +85,10 @@ class TrailerWalk {
                       .type = record.type(),
                       .data = {},
                       .problem = {}};
-        if (!trailer_data_is_valid(bytes, nullptr)) {
-            if (!isDamagedRecord(record)) return std::nullopt;
-            found.problem = record.version() != kTrailerVersion
-                                ? "its version is not 1"
-                                : "it does not begin with its magic, \"t8lr\"";
+        if (const auto fault = faultOfTrailer(record, recordOffset)) {
+            found.problem = fault->rule;
+        } else if (!trailer_data_is_valid(bytes, nullptr)) {
+            return std::nullopt;
         }
         if (trailer_is_terminator(record.firstWord(), record.length())) {
             into_.hasTerminator = true;
@@ -90,7 +97,6 @@ class TrailerWalk {
             return std::nullopt;
         }
         if (record.length() > recordOffset) {
-            found.problem = "its data would begin before the file";
             keep(std::move(found));
             return std::nullopt;
         }
@@ -104,9 +110,8 @@ class TrailerWalk {
 
     void keep(Trailer trailer) {
         // The tool stops at the ticket; faults beyond it are only shown.
-        if (!trailer.problem.empty() && !into_.fault && !ticket_)
-            into_.fault = Fault{"a trailer record is damaged (" + trailer.problem + ")", std::nullopt,
-                                trailer.recordOffset};
+        if (!trailer.problem.empty() && !fault_ && !ticket_)
+            fault_ = TicketPlaceFault{trailer.problem, trailer.recordOffset};
         ++into_.trailerCount;
         if (into_.trailers.size() < kMaximumTrailersKept) into_.trailers.push_back(std::move(trailer));
     }
@@ -115,6 +120,7 @@ class TrailerWalk {
     TrailerWindow window_;
     TrailerPlace& into_;
     std::optional<Range> ticket_;
+    std::optional<TicketPlaceFault> fault_;
 };
 
 /// The ticket's bytes within a superblob: the last ticket counts, as in the tool.
@@ -124,58 +130,41 @@ std::optional<Range> ticketIn(ByteView superblob) {
     return Range{blob->offset + std::uint64_t{kBlobHeaderSize}, blob->bytes.size() - kBlobHeaderSize};
 }
 
-std::optional<Fault> placeFaultOf(const Place& place) {
-    if (const auto* const file = std::get_if<FilePlace>(&place)) return file->fault;
-    if (const auto* const superblob = std::get_if<SuperblobPlace>(&place)) return superblob->fault;
-    if (const auto* const trailers = std::get_if<TrailerPlace>(&place)) return trailers->fault;
-    return std::nullopt;
-}
-
-/// The fault of a genuine ticket that does not accept the artefact.
-std::optional<Fault> listingFaultOf(const Report& report) {
-    const Payload& payload = *report.ticket->payload;
-    if (report.kind == Kind::ticket || payload.matchingEntry) return std::nullopt;
-    Fault fault{report.codeHash ? "the ticket does not list this file"
-                                : "the file has no valid signature, so no ticket can list it",
-                payload.range.offset + 24, std::nullopt};
-    if (report.ticket->fileOffset) fault.fileOffset = *report.ticket->fileOffset + *fault.offset;
-    return fault;
-}
-
-void concludeWithoutTicket(Report& report) {
-    report.fault = placeFaultOf(report.place);
-    report.outcome = report.fault ? Outcome::refused : Outcome::noTicket;
-    if (report.fault) {
-        report.conclusion = "No ticket can be read: " + report.fault->rule + ".";
-    } else if (report.kind == Kind::executable) {
-        report.conclusion = "An executable outside a bundle has no place for a ticket.";
-    } else {
+void concludeWithoutTicket(const std::optional<TicketPlaceFault>& fault, Report& report) {
+    report.fault = faultOf(fault);
+    report.outcome = Outcome::noTicket;
+    if (!fault) {
         report.conclusion = report.codeHash || report.kind == Kind::ticket
                                 ? "No ticket is stapled to this file."
                                 : "No ticket is stapled to this file, and it has no valid signature.";
+    } else if (report.kind == Kind::executable) {
+        report.conclusion = "An executable outside a bundle has no place for a ticket.";
+    } else if (fault->isAbsence) {
+        report.conclusion = "No ticket is stapled to this file: " + fault->rule + ".";
+    } else {
+        report.outcome = Outcome::refused;
+        report.conclusion = "No ticket can be read: " + fault->rule + ".";
+    }
+}
+
+/// The sentence about a ticket that its artefact is refused for.
+std::string conclusionFor(const Refusal& refusal, bool isSigned) {
+    switch (refusal.step) {
+        case RefusalStep::revoked:
+            return "The ticket is genuine, and it marks the software as revoked.";
+        case RefusalStep::listing:
+            return isSigned ? "The ticket is genuine, but it does not list this file."
+                            : "The ticket is genuine, but the file has no valid signature for it to list.";
+        default:
+            return "The ticket is not acceptable: " + refusal.fault.rule + ".";
     }
 }
 
 void concludeWithTicket(Report& report) {
-    const Ticket& ticket = *report.ticket;
-    report.fault = placeFaultOf(report.place);
-    if (!report.fault) report.fault = firstFaultOf(ticket);
-    if (!report.fault && ticket.payload->isRevoked) {
-        report.outcome = Outcome::revoked;
-        report.conclusion = "The ticket is genuine, and it marks the software as revoked.";
-        return;
-    }
-    if (report.fault) {
-        report.outcome = Outcome::refused;
-        report.conclusion = "The ticket is not acceptable: " + report.fault->rule + ".";
-        return;
-    }
-    report.fault = listingFaultOf(report);
-    if (report.fault) {
-        report.outcome = Outcome::refused;
-        report.conclusion =
-            report.codeHash ? "The ticket is genuine, but it does not list this file."
-                            : "The ticket is genuine, but the file has no valid signature for it to list.";
+    if (const std::optional<Refusal>& refusal = report.ticket->refusal) {
+        report.fault = refusal->fault;
+        report.outcome = refusal->step == RefusalStep::revoked ? Outcome::revoked : Outcome::refused;
+        report.conclusion = conclusionFor(*refusal, report.codeHash.has_value());
         return;
     }
     report.outcome = Outcome::good;
@@ -192,28 +181,18 @@ Report& unreadable(Report& report, std::string reason) {
 
 }  // namespace
 
-void Inspector::gatherBundle(const URL& url, Report& report) const {
+std::optional<TicketPlaceFault> Inspector::gatherBundle(const URL& url, Report& report) const {
     report.code = codesign::describeCode(url.path());
     PWHashedBundle bundle(url, platform_);
     setHash(bundle, report);
-    if (report.kind == Kind::executable) return;
-
-    FilePlace place{bundle.codeResourcesURL().path(), std::nullopt};
-    const auto regular = platform_.files.isRegularFile(bundle.codeResourcesURL());
-    if (regular && *regular) {
-        const auto bytes = platform_.files.contentsOfFile(bundle.codeResourcesURL());
-        if (bytes) {
-            report.ticket = gatherTicket(*bytes, 0, report.codeHash, platform_.trust);
-        } else {
-            place.fault = Fault{"the ticket file cannot be read: " + reasonOf(bytes.error()), {}, {}};
-        }
-    } else if (regular) {
-        place.fault = Fault{"Contents/CodeResources is not a regular file", {}, {}};
-    }
-    report.place = std::move(place);
+    const auto fault = explainTicketPlace(bundle, platform_.files);
+    if (report.kind == Kind::executable) return fault;
+    report.place = FilePlace{bundle.codeResourcesURL().path(), faultOf(fault)};
+    if (const auto bytes = bundle.ticketData()) gatherHeldTicket(*bytes, 0, report);
+    return fault;
 }
 
-void Inspector::gatherImage(const URL& url, Report& report) const {
+std::optional<TicketPlaceFault> Inspector::gatherImage(const URL& url, Report& report) const {
     report.code = codesign::describeCode(url.path());
     PWHashedDiskImage image(url, platform_);
     if (image.appropriateExitCode() == kExitOK) {
@@ -223,9 +202,10 @@ void Inspector::gatherImage(const URL& url, Report& report) const {
         report.isMadeUpHash = report.codeHash && !isSigned;
     }
 
+    const auto fault = explainTicketPlace(image, platform_.files);
     SuperblobPlace place;
     place.trailerOffset = image.origEOF() < kUDIFHeaderSize ? 0 : image.origEOF() - kUDIFHeaderSize;
-    if (image.fault()) place.fault = Fault{image.fault()->rule, std::nullopt, image.fault()->offset};
+    place.fault = faultOf(fault);
     const bool isSet = image.dmgHeader().codeSignOffset() != 0 && image.dmgHeader().codeSignLength() != 0;
     if (isSet && image.dmgHeader().hasMagic()) {
         place.superblob = Range{image.dmgHeader().codeSignOffset(), image.dmgHeader().codeSignLength()};
@@ -233,38 +213,44 @@ void Inspector::gatherImage(const URL& url, Report& report) const {
         codesign::SignatureDescription table = codesign::describeSignature(image.superblob());
         place.blobs = std::move(table.blobs);
         place.blobCount = table.blobCount;
-        if (const auto found = ticketIn(image.superblob())) {
-            const ByteView bytes = image.superblob().view().subspan(found->offset, found->length);
-            report.ticket =
-                gatherTicket(bytes, image.csStart() + found->offset, report.codeHash, platform_.trust);
-        }
+        if (const auto found = ticketIn(image.superblob()))
+            gatherHeldTicket(image.superblob().view().subspan(found->offset, found->length),
+                             image.csStart() + found->offset, report);
     }
     report.place = std::move(place);
+    return fault;
 }
 
-void Inspector::gatherPackage(const URL& url, Report& report) const {
+std::optional<TicketPlaceFault> Inspector::gatherPackage(const URL& url, Report& report) const {
     PWHashedFlatPackage package(url, platform_);
     setHash(package, report);
 
     TrailerPlace place;
+    std::optional<TicketPlaceFault> fault;
     const auto file = platform_.files.openForReading(url);
-    if (!file) {
-        place.fault = Fault{"the package cannot be read: " + reasonOf(file.error()), {}, {}};
-        report.place = std::move(place);
-        return;
-    }
-    try {
-        TrailerWalk walk(**file, place);
-        walk.run();
-        if (walk.ticket()) {
-            (*file)->seek(walk.ticket()->offset);
-            const foundation::SharedBytes bytes = files::readShared(**file, walk.ticket()->length);
-            report.ticket = gatherTicket(bytes, walk.ticket()->offset, report.codeHash, platform_.trust);
+    if (file) {
+        try {
+            TrailerWalk walk(**file, place);
+            walk.run();
+            fault = walk.fault();
+            if (const auto& ticket = walk.ticket(); ticket && ticket->length > 0) {
+                (*file)->seek(ticket->offset);
+                gatherHeldTicket(files::readShared(**file, ticket->length), ticket->offset, report);
+            }
+        } catch (const files::FileHandleError& failure) {
+            fault = TicketPlaceFault{std::string("the package cannot be read: ") + failure.what(), {}};
         }
-    } catch (const files::FileHandleError& failure) {
-        place.fault = Fault{std::string("the package cannot be read: ") + failure.what(), {}, {}};
+    } else {
+        fault = TicketPlaceFault{"the package cannot be read: " + reasonOf(file.error()), {}};
     }
+    place.fault = faultOf(fault);
     report.place = std::move(place);
+    return fault;
+}
+
+void Inspector::gatherHeldTicket(ByteView bytes, std::uint64_t fileOffset, Report& report) const {
+    if (bytes.empty()) return;  // the tool takes it for no ticket
+    report.ticket = gatherTicket(bytes, fileOffset, Holder{report.codeHash}, platform_.trust);
 }
 
 bool Inspector::gatherBareTicket(const URL& url, bool mustLookLikeOne, Report& report) const {
@@ -296,38 +282,41 @@ Report Inspector::inspect(const std::string& path) const {
     }
 
     const std::string extension = url.pathExtension();
+    std::optional<TicketPlaceFault> fault;
     switch (assessmentClassForUTI(platform_.types, properties->typeIdentifier, extension)) {
         case AssessmentClass::bundle:
             // An executable file may still be a ticket.
             if (isFile && gatherBareTicket(url, true, report)) break;
             report.kind = isFile ? Kind::executable : Kind::bundle;
-            gatherBundle(url, report);
+            fault = gatherBundle(url, report);
             break;
         case AssessmentClass::diskImage:
             report.kind = Kind::diskImage;
-            gatherImage(url, report);
+            fault = gatherImage(url, report);
             break;
         case AssessmentClass::package:
             report.kind = Kind::package;
             if (!isFile) return unreadable(report, "A package that is a directory carries no ticket.");
-            gatherPackage(url, report);
+            fault = gatherPackage(url, report);
             break;
         case AssessmentClass::unknown:
             if (properties->isDirectory && platform_.files.mainExecutableOfBundle(url)) {
                 report.kind = Kind::bundle;
-                gatherBundle(url, report);
+                fault = gatherBundle(url, report);
             } else if (!isFile || !gatherBareTicket(url, extension != "ticket", report)) {
                 return unreadable(report, "This is nothing that carries a ticket.");
             }
             break;
     }
     const auto* const image = std::get_if<SuperblobPlace>(&report.place);
-    if (image != nullptr && image->fault && !image->superblob)
+    if (image != nullptr && image->fault && !image->superblob) {
+        report.fault = image->fault;
         return unreadable(report, "This is no disk image that can be read: " + image->fault->rule + ".");
-    if (report.ticket) {
+    }
+    if (report.ticket && !fault) {
         concludeWithTicket(report);
     } else {
-        concludeWithoutTicket(report);
+        concludeWithoutTicket(fault, report);
     }
     return report;
 }

@@ -1,10 +1,12 @@
 // Gathers everything about a path that concerns its ticket. Only reads; no network.
 #pragma once
 
+#include <optional>
 #include <string>
 
 #include "foundation/url.h"
 #include "inspect/report.h"
+#include "src/PWHashedFile/ticket_place.h"
 #include "src/platform.h"
 
 namespace pinwell::inspect {
@@ -19,9 +21,11 @@ class Inspector {
     Report inspect(const std::string& path) const;
 
   private:
-    void gatherBundle(const foundation::URL& url, Report& report) const;
-    void gatherImage(const foundation::URL& url, Report& report) const;
-    void gatherPackage(const foundation::URL& url, Report& report) const;
+    // Each returns the fault of the ticket's place.
+    std::optional<TicketPlaceFault> gatherBundle(const foundation::URL& url, Report& report) const;
+    std::optional<TicketPlaceFault> gatherImage(const foundation::URL& url, Report& report) const;
+    std::optional<TicketPlaceFault> gatherPackage(const foundation::URL& url, Report& report) const;
+    void gatherHeldTicket(foundation::ByteView bytes, std::uint64_t fileOffset, Report& report) const;
     bool gatherBareTicket(const foundation::URL& url, bool mustLookLikeOne, Report& report) const;
 
     Platform platform_;

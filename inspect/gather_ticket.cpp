@@ -3,8 +3,8 @@
 #include <algorithm>
 #include <utility>
 
-#include "foundation/format.h"
 #include "foundation/value.h"
+#include "src/explain_ticket.h"
 #include "src/satchel.h"
 #include "src/satchel_internal.h"
 #include "src/tm_ticket.h"
@@ -81,19 +81,13 @@ void gatherCertificates(ByteView block, Ticket& into) {
     closeGap(block.size());
 }
 
-std::optional<Fault> certificateFaultOf(ByteView block, const Ticket& ticket, const Offsets& offsets) {
-    const std::uint64_t base = ticket.certificateBlock->offset;
-    const satchel_certificate_block survey = satchel_survey_certificates(block);
-    for (std::size_t i = 0; i < survey.count; ++i) {
-        const auto start = base + static_cast<std::uint64_t>(survey.elements[i].data() - block.data());
-        const bool readable = std::any_of(ticket.certificates.begin(), ticket.certificates.end(),
-                                          [&](const Certificate& one) { return one.range.offset == start; });
-        if (!readable)
-            return offsets.fault(foundation::format("certificate %zu cannot be read", i + 1), start);
-    }
-    return offsets.fault(survey.fault, base);
+std::optional<Fault> certificateFaultOf(ByteView block, std::uint64_t base, const Offsets& offsets,
+                                        trust::TrustService& service) {
+    const auto fault = explainCertificates(block, satchel_survey_certificates(block), service);
+    return fault ? std::optional(offsets.fault(fault->reason, base + fault->offset)) : std::nullopt;
 }
 
+/// The chain of all certificates that can be read, even if the block is damaged.
 void judgeChain(ByteView bytes, const satchel_view& view, trust::TrustService& service, Ticket& into) {
     std::vector<trust::CertificateRef> list;
     for (const Certificate& one : into.certificates)
@@ -103,25 +97,11 @@ void judgeChain(ByteView bytes, const satchel_view& view, trust::TrustService& s
         into.chain.reason = "there is no certificate that can be read";
         return;
     }
-
-    trust::PolicyRef policy;
-    if (_satchel_create_cert_policy(&policy, service) != satchel_status::kSuccess) {
-        into.chain.reason = "the platform security library has no policy for tickets";
-        return;
-    }
-    std::shared_ptr<trust::Trust> object;
-    trust::Verdict verdict = trust::Verdict::invalid;
-    if (service.createTrust(list, policy, object) != trust::kSuccess || object == nullptr ||
-        object->evaluate(verdict) != trust::kSuccess) {
-        into.chain.reason = "the chain could not be judged";
-        return;
-    }
-    into.chain.trusted = verdict == trust::Verdict::unspecified;
-    if (verdict == trust::Verdict::proceed)
-        into.chain.reason = "only the user's own settings trust the chain, which is not enough for a ticket";
-    else if (!into.chain.trusted)
-        into.chain.reason = object->copyFailureDescription().value_or("the chain is not trusted");
-    for (const foundation::Value& one : object->copyProperties()) {
+    const JudgedChain chain = judgeTicketChain(list, service);
+    into.chain.trusted = chain.isTrusted();
+    into.chain.reason = chain.problem;
+    if (chain.evaluated == nullptr) return;
+    for (const foundation::Value& one : chain.evaluated->copyProperties()) {
         const std::string* const title = one[trust::kPropertyTitle].string();
         const std::string* const error = one[trust::kPropertyError].string();
         into.chain.links.push_back({title == nullptr ? "" : *title, error == nullptr ? "" : *error});
@@ -130,7 +110,7 @@ void judgeChain(ByteView bytes, const satchel_view& view, trust::TrustService& s
     // Without the signer's own certificate the list begins with another, whose key proves nothing.
     const bool signerIsReadable =
         into.unreadable.empty() || into.certificates.front().range.offset < into.unreadable.front().offset;
-    const trust::PublicKeyRef key = object->copyPublicKey();
+    const trust::PublicKeyRef key = chain.evaluated->copyPublicKey();
     if (key == nullptr || !signerIsReadable) return;
     const auto status = _satchel_validate_signature(*key, ByteView(view.signed_data, view.signed_data_length),
                                                     ByteView(view.signature, view.signature_length), service);
@@ -170,6 +150,14 @@ Payload gatherPayload(const tm_ticket_survey& survey, Range range, const std::op
     return payload;
 }
 
+std::optional<Refusal> refusalOf(ByteView bytes, const std::optional<Holder>& holder, const Offsets& offsets,
+                                 trust::TrustService& service) {
+    const auto hash = holder && holder->hash ? std::optional(holder->hash->bytes) : std::nullopt;
+    const auto refusal = holder ? explain_ticket(bytes, hash, service) : explain_ticket(bytes, service);
+    if (!refusal) return std::nullopt;
+    return Refusal{refusal->step, offsets.fault(refusal->reason, refusal->offset)};
+}
+
 Range rangeIn(ByteView bytes, const std::byte* start, std::uint64_t length) {
     return {static_cast<std::uint64_t>(start - bytes.data()), length};
 }
@@ -177,11 +165,12 @@ Range rangeIn(ByteView bytes, const std::byte* start, std::uint64_t length) {
 }  // namespace
 
 Ticket gatherTicket(ByteView bytes, std::optional<std::uint64_t> fileOffset,
-                    const std::optional<Hash>& artefactHash, trust::TrustService& service) {
+                    const std::optional<Holder>& holder, trust::TrustService& service) {
     const Offsets offsets(fileOffset);
     Ticket ticket;
     ticket.size = bytes.size();
     ticket.fileOffset = fileOffset;
+    ticket.refusal = refusalOf(bytes, holder, offsets, service);
 
     const satchel_survey frame = satchel_survey_container(bytes);
     ticket.frameFault = offsets.fault(frame.fault, 0);
@@ -198,12 +187,13 @@ Ticket gatherTicket(ByteView bytes, std::optional<std::uint64_t> fileOffset,
     ticket.certificateBlock = rangeIn(bytes, block.data(), block.size());
     ticket.signatureField = rangeIn(bytes, frame.view.signature, frame.view.signature_length);
     gatherCertificates(block, ticket);
-    ticket.certificateFault = certificateFaultOf(block, ticket, offsets);
+    ticket.certificateFault = certificateFaultOf(block, ticket.certificateBlock->offset, offsets, service);
     judgeChain(bytes, frame.view, service, ticket);
 
     const ByteView payload(frame.view.payload, frame.view.payload_length);
     const tm_ticket_survey survey = tm_ticket_survey_payload(payload);
-    ticket.payload = gatherPayload(survey, rangeIn(bytes, payload.data(), payload.size()), artefactHash);
+    ticket.payload = gatherPayload(survey, rangeIn(bytes, payload.data(), payload.size()),
+                                   holder ? holder->hash : std::nullopt);
     ticket.payload->fault = offsets.fault(survey.fault, ticket.payload->range.offset);
     return ticket;
 }
@@ -217,27 +207,6 @@ bool looksLikeTicket(ByteView bytes) {
     const satchel_survey survey = satchel_survey_container(bytes);
     return survey.view.payload != nullptr &&
            beginsWith(ByteView(survey.view.payload, survey.view.payload_length), kTicketMagic);
-}
-
-std::optional<Fault> firstFaultOf(const Ticket& ticket) {
-    const Offsets offsets(ticket.fileOffset);
-    if (ticket.frameFault) return ticket.frameFault;
-    if (ticket.certificateFault) return ticket.certificateFault;
-    if (!ticket.chain.trusted) {
-        std::uint64_t offset = ticket.certificateBlock ? ticket.certificateBlock->offset : 0;
-        for (const Link& link : ticket.chain.links) {
-            if (link.error.empty() || !ticket.chain.reason.ends_with(link.error)) continue;
-            const auto found =
-                std::find_if(ticket.certificates.begin(), ticket.certificates.end(),
-                             [&](const Certificate& one) { return one.description.summary == link.title; });
-            if (found != ticket.certificates.end()) offset = found->range.offset;
-            break;
-        }
-        return offsets.fault("the chain is not trusted (" + ticket.chain.reason + ")", offset);
-    }
-    if (ticket.signature != Signature::verifies)
-        return offsets.fault("the signature does not verify", ticket.signatureField->offset);
-    return ticket.payload ? ticket.payload->fault : std::nullopt;
 }
 
 }  // namespace pinwell::inspect

@@ -7,16 +7,17 @@
 
 namespace pinwell::inspect {
 
-/// Searches the entries for `artefactHash`, if given. Does not decide whether the ticket is
-/// acceptable.
+/// The artefact that a ticket is attached to.
+struct Holder {
+    std::optional<Hash> hash;  // `nullopt` without a valid signature
+};
+
+/// Shows the ticket, with the reason if explain_ticket refuses it. `holder` is `nullopt` for a ticket by
+/// itself, which is then judged without an artefact.
 Ticket gatherTicket(foundation::ByteView bytes, std::optional<std::uint64_t> fileOffset,
-                    const std::optional<Hash>& artefactHash, trust::TrustService& service);
+                    const std::optional<Holder>& holder, trust::TrustService& service);
 
 /// Whether the bytes look like a ticket, possibly a damaged one.
 bool looksLikeTicket(foundation::ByteView bytes);
-
-/// The first rule that fails, in the tool's order; `nullopt` for a ticket that the tool accepts as genuine.
-/// Ignores the revoked flag and the entries.
-std::optional<Fault> firstFaultOf(const Ticket& ticket);
 
 }  // namespace pinwell::inspect

@@ -12,6 +12,7 @@
 
 #include "codesign/code_description.h"
 #include "foundation/bytes.h"
+#include "src/explain_ticket.h"
 #include "trust/certificate_description.h"
 
 namespace pinwell::inspect {
@@ -134,6 +135,12 @@ struct Payload {
     std::optional<Fault> fault;
 };
 
+/// Why the ticket is refused: for itself, or for the artefact that it is attached to.
+struct Refusal {
+    RefusalStep step = RefusalStep::container;
+    Fault fault;
+};
+
 struct Ticket {
     std::uint64_t size = 0;
     std::optional<std::uint64_t> fileOffset;  // in the file that holds it
@@ -152,6 +159,8 @@ struct Ticket {
     Chain chain;
     Signature signature = Signature::unchecked;
     std::optional<Payload> payload;  // `nullopt` if the container is too short for it
+
+    std::optional<Refusal> refusal;  // by the first broken rule
 };
 
 /// In the order of gravity: the worst of several paths decides the exit status.

@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "library/local_platform.h"
+#include "src/explain_ticket.h"
 #include "src/record_name.h"
 #include "verify/artefact_kind.h"
 #include "verify/check_names.h"
@@ -74,7 +75,6 @@ class Assessor {
              const Settings& settings)
         : url_(URL::fileURLWithPath(path)),
           depth_(depth),
-          roots_(roots),
           settings_(settings),
           platform_(&roots, settings.evaluationTime),
           services_(platform_.services()) {}
@@ -108,6 +108,7 @@ class Assessor {
             return false;
         }
         file_ = std::move(opened.file);
+        placeFault_ = explainTicketPlace(*file_, services_.files);
         kind_ = opened.kind;
         found_.kind = numberOf(kind_);
         return true;
@@ -125,9 +126,14 @@ class Assessor {
     }
 
     void withoutSignature() {
-        atLeast(PINWELL_VERDICT_UNREADABLE, "It has no valid signature.");
-        checks_.cannotRead(verify::kSignature, {}, "there is no valid signature");
+        const bool isDamaged = isPlaceDamaged();
+        atLeast(PINWELL_VERDICT_UNREADABLE,
+                isDamaged ? verify::conclusionWithoutTicket(placeFault_) : "It has no valid signature.");
+        checks_.cannotRead(verify::kSignature, {},
+                           isDamaged ? placeFault_->rule : "there is no valid signature");
     }
+
+    bool isPlaceDamaged() const { return placeFault_ && !placeFault_->isAbsence; }
 
     // As in the tool: without a hash, the ticket is not read.
     void judgeTicketAlone() {
@@ -153,18 +159,14 @@ class Assessor {
     }
 
     bool judgeTicket() {
-        if (!found_.ticket) {
-            checks_.fail(verify::kTicketStapled, kStapledPlace, "a ticket",
-                         kind_ == Kind::executable
-                             ? "none: an executable outside a bundle has no place for one"
-                             : "none");
-            atLeast(PINWELL_VERDICT_NO_TICKET, "No ticket is stapled to it.");
+        if (!found_.ticket || placeFault_) {
+            verify::checkMissingTicket(placeFault_, kStapledPlace, checks_);
+            atLeast(isPlaceDamaged() ? PINWELL_VERDICT_REFUSED : PINWELL_VERDICT_NO_TICKET,
+                    verify::conclusionWithoutTicket(placeFault_));
             return false;
         }
         checks_.pass(verify::kTicketStapled, kStapledPlace, "a ticket");
-        judged_.emplace(*found_.ticket, services_.trust, [&] {
-            return ticket::validate(*found_.ticket, roots_, settings_.evaluationTime).reason;
-        });
+        judged_.emplace(*found_.ticket, services_.trust);
         if (verify::checkTicket(*judged_, found_.codeHash, kStapledPlace, checks_)) return true;
         if (judged_->isGenuine() && judged_->isRevoked())
             atLeast(PINWELL_VERDICT_REVOKED, "Its ticket revokes it: it must not run.");
@@ -175,8 +177,7 @@ class Assessor {
 
     std::string faultOfTicket() const {
         if (!judged_->isGenuine()) return judged_->fault();
-        return found_.codeHash ? "it does not list this artefact"
-                               : "the artefact has no hash that a ticket could list";
+        return found_.codeHash ? kNotListed : kNothingToList;
     }
 
     void takeOutcome(Outcome worst) {
@@ -186,12 +187,12 @@ class Assessor {
 
     const URL url_;
     const Depth depth_;
-    const ticket::TrustedRoots& roots_;
     const Settings settings_;
     const LocalPlatform platform_;
     const Platform services_;
     std::shared_ptr<PWHashedFile> file_;
     Kind kind_ = Kind::bundle;
+    std::optional<TicketPlaceFault> placeFault_;
     std::optional<verify::JudgedTicket> judged_;
     verify::Section checks_;
     Assessment found_;

@@ -20,12 +20,6 @@ using Opened = foundation::Result<std::unique_ptr<FileReader>>;
 /// The parsers' own messages, which name the file, are for the tool's verbose mode.
 constexpr const char* kNoName = "";
 
-/// A ticket is returned whole or not at all.
-constexpr const char* kTooLong = "the ticket is too long to be read";
-bool isTooLong(std::uint64_t length) {
-    return heldOfTicket(length) != length;
-}
-
 Slot slotOf(const BlobRecord& blob, std::uint64_t superblobOffset) {
     return {blob.slotType,
             std::string(slotName(blob.slotType)),
@@ -48,10 +42,11 @@ Result<DiskImage> diskImageIn(FileReader& file) {
     for (const BlobRecord& blob : read.blobs) image.slots.push_back(slotOf(blob, read.csStart));
     if (const BlobRecord* const blob = ticketBlobOf(read.blobs)) {
         const ByteView bytes = ticketIn(*blob);
-        if (isTooLong(bytes.size())) return malformed({read.csStart + blob->offset, kTooLong});
         const Range whole = slotOf(*blob, read.csStart).range;
-        image.ticket = FoundTicket{{whole.offset + whole.length - bytes.size(), bytes.size()},
-                                   foundation::toData(bytes)};
+        const std::uint64_t offset = whole.offset + whole.length - bytes.size();
+        // A ticket is returned whole or not at all.
+        if (const auto fault = faultOfTicketLength(bytes.size(), offset)) return malformed(*fault);
+        image.ticket = FoundTicket{{offset, bytes.size()}, foundation::toData(bytes)};
     }
     return image;
 }
@@ -68,7 +63,7 @@ Result<FlatPackage> flatPackageIn(FileReader& file) {
     if (read.fault) return malformed(*read.fault);
     package.fileSize = read.fileSize;
     package.hasTerminator = read.hasTerminator;
-    if (isTooLong(read.ticketLength)) return malformed({read.ticketStart, kTooLong});
+    if (const auto fault = faultOfTicketLength(read.ticketLength, read.ticketStart)) return malformed(*fault);
     if (read.ticket)
         package.ticket = FoundTicket{{read.ticketStart, read.ticketLength}, *std::move(read.ticket)};
     return package;

@@ -5,6 +5,7 @@
 #include "library/failure.h"
 #include "library/local_platform.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
+#include "src/PWHashedFile/ticket_place.h"
 #include "src/record_name.h"
 #include "verify/artefact_kind.h"
 
@@ -29,10 +30,11 @@ verify::OpenedArtefact opened(const URL& url, const Platform& platform) {
     return artefact;
 }
 
-LocatedTicket ticketOfBundle(const PWHashedBundle& bundle, files::FileManager& files) {
+LocatedTicket ticketOfBundle(PWHashedBundle& bundle, files::FileManager& files) {
+    const auto fault = explainTicketPlace(bundle, files);
+    if (fault && fault->isAbsence) throw Failure{PINWELL_ERROR_NO_TICKET, fault->rule};
     const URL url = bundle.codeResourcesURL();
-    const auto regular = files.isRegularFile(url);
-    if (!regular || !*regular) throw Failure{PINWELL_ERROR_NO_TICKET, kNoTicket};
+    if (!files.isRegularFile(url)) throw Failure{PINWELL_ERROR_NO_TICKET, kNoTicket};
     auto bytes = files.contentsOfFile(url);
     if (!bytes) throw failureOf(bytes.error());
     if (bytes->empty()) throw Failure{PINWELL_ERROR_NO_TICKET, kNoTicket};
@@ -56,15 +58,14 @@ LocatedTicket findTicket(const std::string& path) {
     const verify::OpenedArtefact artefact = opened(url, services);
     switch (artefact.kind) {
         case Kind::bundle:
-            return ticketOfBundle(dynamic_cast<const PWHashedBundle&>(*artefact.file), services.files);
+        case Kind::executable:
+            break;
         case Kind::diskImage:
             return ticketOfFile(ticket::readDiskImage(url.path()), url.path());
         case Kind::package:
             return ticketOfFile(ticket::readFlatPackage(url.path()), url.path());
-        case Kind::executable:
-            break;
     }
-    throw Failure{PINWELL_ERROR_NO_TICKET, "an executable outside a bundle has no place for a ticket"};
+    return ticketOfBundle(dynamic_cast<PWHashedBundle&>(*artefact.file), services.files);
 }
 
 std::string recordNameOfFile(const std::string& path) {

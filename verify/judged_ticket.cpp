@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "foundation/format.h"
+#include "src/explain_ticket.h"
 #include "src/satchel.h"
 #include "src/tm_ticket.h"
 #include "verify/check_names.h"
@@ -11,11 +12,10 @@ namespace pinwell::verify {
 
 using foundation::format;
 
-JudgedTicket::JudgedTicket(ByteView bytes, trust::TrustService& trust,
-                           const std::function<std::string()>& explain) {
+JudgedTicket::JudgedTicket(ByteView bytes, trust::TrustService& trust) {
     tm_ticket* decoded = nullptr;
     if (satchel_get_validated_tm_ticket(bytes.data(), bytes.size(), &decoded, trust) != 0) {
-        fault_ = explain();
+        fault_ = explainRefusedTicket(bytes, trust).reason;
         return;
     }
     const tm_ticket_ptr ticket(decoded);
@@ -33,6 +33,21 @@ JudgedTicket::JudgedTicket(ByteView bytes, trust::TrustService& trust,
 
 bool JudgedTicket::lists(ByteView codeHash) const {
     return entries_.contains(foundation::toString(codeHash));
+}
+
+void checkMissingTicket(const std::optional<TicketPlaceFault>& fault, const std::string& place,
+                        Section& section) {
+    const bool isDamaged = fault && !fault->isAbsence;
+    section.fail(kTicketStapled, place, "a ticket",
+                 isDamaged ? fault->rule
+                 : fault   ? "none: " + fault->rule
+                           : "none");
+}
+
+std::string conclusionWithoutTicket(const std::optional<TicketPlaceFault>& fault) {
+    if (!fault) return "No ticket is stapled to it.";
+    return (fault->isAbsence ? "No ticket is stapled to it: " : "No ticket can be read: ") + fault->rule +
+           ".";
 }
 
 bool checkTicket(const JudgedTicket& ticket, const std::optional<Data>& codeHash, const std::string& place,

@@ -8,6 +8,7 @@
 #include <unordered_set>
 
 #include "foundation/bytes.h"
+#include "src/PWHashedFile/ticket_place.h"
 #include "trust/trust.h"
 #include "verify/check.h"
 #include "verify/executable.h"
@@ -19,9 +20,8 @@ using foundation::ByteView;
 /// The statements of a genuine ticket.
 class JudgedTicket {
   public:
-    /// Judges `bytes` like the tool (satchel_get_validated_tm_ticket). For a ticket that is not genuine,
-    /// calls `explain`, which returns the reason.
-    JudgedTicket(ByteView bytes, trust::TrustService& trust, const std::function<std::string()>& explain);
+    /// Judges `bytes` like the tool (satchel_get_validated_tm_ticket).
+    JudgedTicket(ByteView bytes, trust::TrustService& trust);
 
     bool isGenuine() const noexcept { return isGenuine_; }
     bool isRevoked() const noexcept { return isRevoked_; }
@@ -43,6 +43,12 @@ class JudgedTicket {
     std::string fault_;
     std::unordered_set<std::string> entries_;
 };
+
+/// For an artefact whose ticket is missing or cannot be read, with the fault of the ticket's place if there
+/// is one: adds the failed check, and gives the conclusion, a sentence.
+void checkMissingTicket(const std::optional<TicketPlaceFault>& fault, const std::string& place,
+                        Section& section);
+std::string conclusionWithoutTicket(const std::optional<TicketPlaceFault>& fault);
 
 /// Adds the checks of one ticket: genuine, not revoking, listing the artefact. `place` names the ticket.
 /// Returns whether all passed.

@@ -23,6 +23,9 @@ class PWHashedFlatPackage : public PWHashedFile {
     std::uint64_t ticketStart() const noexcept { return trailers_.ticketStart; }
     std::uint64_t ticketLength() const noexcept { return trailers_.ticketLength; }
 
+    /// Why the walk found no ticket, with the offset in the file; `nullopt` if it met no damage.
+    const std::optional<ticket_fault>& fault() const noexcept { return trailers_.fault; }
+
     /// There is a terminator, or a trailer of unknown type.
     bool hasTrailers() const noexcept { return trailers_.hasTrailers; }
 

@@ -7,8 +7,10 @@
 
 #include <algorithm>
 #include <cstdint>
+#include <optional>
 
 #include "src/satchel.h"
+#include "src/ticket_fault.h"
 #include "src/tm_ticket.h"
 
 namespace pinwell {
@@ -22,6 +24,12 @@ static_assert(kSatchelMaximumCertificates * kSatchelMaximumCertificateSize + kTi
 /// How many bytes of a ticket of that length are held.
 inline std::uint64_t heldOfTicket(std::uint64_t length) {
     return std::min(length, kLongestTicketHeld);
+}
+
+/// The fault of a ticket of that length that begins at `offset` in its file; `nullopt` if it is held whole.
+inline std::optional<ticket_fault> faultOfTicketLength(std::uint64_t length, std::uint64_t offset) {
+    if (heldOfTicket(length) == length) return std::nullopt;
+    return ticket_fault{offset, "the ticket is too long to be read"};
 }
 
 }  // namespace pinwell

@@ -77,6 +77,18 @@ bool trailer_data_is_valid(ByteView bytes, trailer_header* record) {
     return true;
 }
 
+std::optional<ticket_fault> faultOfTrailer(const trailer_header& record, std::uint64_t recordOffset) {
+    const bool hasMagic = record.magic() == kTrailerMagic;
+    const bool hasVersion = record.version() == kTrailerVersion;
+    const bool hasKnownType = record.type() == kTerminatorTrailerType || record.type() == kTicketTrailerType;
+    if (!hasMagic && !(hasVersion && hasKnownType)) return std::nullopt;
+    if (!hasVersion) return ticket_fault{recordOffset, "a trailer's version is not 1"};
+    if (!hasMagic) return ticket_fault{recordOffset, "a trailer does not begin with its magic, \"t8lr\""};
+    if (record.length() > recordOffset)
+        return ticket_fault{recordOffset, "a trailer's data would begin before the file"};
+    return std::nullopt;
+}
+
 bool trailer_is_terminator(std::uint64_t firstWord, std::uint64_t length) {
     const auto countedLength = static_cast<std::uint32_t>(length);
     if (countedLength != 0) {

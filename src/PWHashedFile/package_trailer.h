@@ -16,9 +16,11 @@
 
 #include <array>
 #include <cstdint>
+#include <optional>
 #include <string>
 
 #include "foundation/bytes.h"
+#include "src/ticket_fault.h"
 
 namespace pinwell {
 
@@ -58,6 +60,10 @@ bool isWritableTicketLength(std::uint64_t length);
 /// Whether the bytes are a record with a known version and magic; prints the reason if not. A non-null
 /// `record` gets the bytes of a valid record.
 bool trailer_data_is_valid(foundation::ByteView bytes, trailer_header* record);
+
+/// The fault of a damaged record at `recordOffset`; `nullopt` for a sound record. `nullopt` as well for bytes
+/// that do not look like a record: a record has the magic, or a known version and type.
+std::optional<ticket_fault> faultOfTrailer(const trailer_header& record, std::uint64_t recordOffset);
 
 /// Whether a valid record with these first 8 bytes and this length is the terminator; prints the reason if
 /// not. Only the low 32 bits of the length are tested.

@@ -14,6 +14,7 @@ namespace {
 
 using files::FileHandleError;
 using files::FileReader;
+using foundation::ByteView;
 using foundation::Data;
 using foundation::SharedBytes;
 using foundation::SparseBuffer;
@@ -109,7 +110,11 @@ class Walk {
         }
         const std::uint64_t recordOffset = position - kTrailerSize;
         trailer_header record;
-        if (!trailer_data_is_valid(window_.readAt(recordOffset, kTrailerSize), &record)) return std::nullopt;
+        const ByteView bytes = window_.readAt(recordOffset, kTrailerSize);
+        if (!trailer_data_is_valid(bytes, &record)) {
+            noteDamage(bytes, recordOffset);
+            return std::nullopt;
+        }
         if (visit_) visit_(recordOffset, record);
         if (trailer_is_terminator(record.firstWord(), record.length())) {
             found_.hasTrailers = found_.hasTerminator = true;
@@ -122,7 +127,7 @@ class Walk {
 
         const std::uint64_t total = record.length() + std::uint64_t{kTrailerSize};
         if (total > position) {
-            refuse(recordOffset, "a trailer's data would begin before the file");
+            found_.fault = faultOfTrailer(record, recordOffset);
             isWhole = false;
             return std::nullopt;
         }
@@ -133,6 +138,14 @@ class Walk {
         }
         collect(record, start, total);
         return start;
+    }
+
+    // Without a fault these bytes are not a record: the archive's, in a package without trailers.
+    void noteDamage(ByteView bytes, std::uint64_t recordOffset) {
+        trailer_header damaged;
+        if (bytes.size() != damaged.bytes.size()) return;
+        std::copy(bytes.begin(), bytes.end(), damaged.bytes.begin());
+        found_.fault = faultOfTrailer(damaged, recordOffset);
     }
 
     SharedBytes readAt(std::uint64_t start, std::uint64_t length) {

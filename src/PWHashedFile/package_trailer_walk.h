@@ -2,7 +2,8 @@
 // or the terminator, whichever comes first. Bytes that are not a known record end it as well: without
 // trailers, that is the archive itself.
 //
-// A walk that ends with a fault has found no ticket. A file shorter than a record is not a fault.
+// A walk that ends with a fault has found no ticket. The fault of a damaged record changes nothing else: the
+// tool takes such a package for one without a ticket. A file shorter than a record is not a fault.
 //
 // There is no limit on the trailers' number or length. Time is in proportion to the bytes of the walk without
 // holes, and memory to its non-zero bytes.

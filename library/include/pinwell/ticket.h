@@ -258,9 +258,9 @@ struct FlatPackage {
     std::optional<FoundTicket> ticket;
 };
 
-/// The trailers of a flat package, from the end of the file to the ticket or to the end of the chain. A
-/// file without a trailer at its end counts as a package without a ticket: the archive itself is not
-/// checked.
+/// The trailers of a flat package, from the end of the file to the ticket or to the end of the chain. A damaged
+/// record before the ticket is found is malformed. A file without a trailer at its end counts as a package
+/// without a ticket: the archive itself is not checked.
 PINWELL_TICKET_API Result<FlatPackage> readFlatPackage(const std::string& path);
 PINWELL_TICKET_API Result<FlatPackage> readFlatPackage(int descriptor);
 

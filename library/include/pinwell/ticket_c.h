@@ -107,7 +107,7 @@ enum {
     PINWELL_VERDICT_GOOD = 1,       /**< all checks passed */
     PINWELL_VERDICT_UNREADABLE = 2, /**< it cannot be read, is of no supported kind, or has no valid signature */
     PINWELL_VERDICT_NO_TICKET = 3,  /**< no ticket is attached */
-    PINWELL_VERDICT_REFUSED = 4,    /**< the ticket is not genuine, or does not list the artefact */
+    PINWELL_VERDICT_REFUSED = 4,    /**< the ticket is not genuine, does not list the artefact, or is in a damaged place */
     PINWELL_VERDICT_ALTERED = 5,    /**< something has changed since signing; from pinwell_verify_file() only */
     PINWELL_VERDICT_REVOKED = 6     /**< the ticket is genuine and revokes the software: it must not run */
 };

@@ -86,8 +86,10 @@ TEST_F(Inspection, OfABundleWithALinkForATicketFileReadsNoTicket) {
     const std::string path = bundle();
     makeLink("/nowhere", ticketFileOf(path));
     const Report report = inspect(path);
-    EXPECT_EQ(report.outcome, Outcome::refused);
+    EXPECT_EQ(report.outcome, Outcome::noTicket);
     EXPECT_EQ(report.fault->rule, "Contents/CodeResources is not a regular file");
+    EXPECT_EQ(report.conclusion,
+              "No ticket is stapled to this file: Contents/CodeResources is not a regular file.");
 }
 
 TEST_F(Inspection, OfAnUnsignedBundleSaysThatNoTicketCanListIt) {
@@ -98,7 +100,7 @@ TEST_F(Inspection, OfAnUnsignedBundleSaysThatNoTicketCanListIt) {
     const Report report = inspect(path);
     EXPECT_FALSE(report.codeHash);
     EXPECT_EQ(report.outcome, Outcome::refused);
-    EXPECT_EQ(report.fault->rule, "the file has no valid signature, so no ticket can list it");
+    EXPECT_EQ(report.fault->rule, "the artefact has no valid signature, so no ticket can list it");
 }
 
 TEST_F(Inspection, OfSeveralSlicesShowsEachAndMarksTheMainOne) {

@@ -290,7 +290,7 @@ TEST_F(CInterface, SaysWhyATicketIsRefused) {
     EXPECT_EQ(reason("an application whose ticket differs in its last byte"),
               "Its ticket is not acceptable: the signature does not verify.");
     EXPECT_EQ(reason("an application with a stale ticket, which lists other software"),
-              "Its ticket is not acceptable: it does not list this artefact.");
+              "Its ticket is not acceptable: the ticket does not list this artefact.");
     EXPECT_THAT(reason("an application with a ticket of another authority"),
                 StartsWith("Its ticket is not acceptable: "));
 }

@@ -168,6 +168,14 @@ TEST_F(FindingATicket, RefusesATrailerWhoseDataWouldBeginBeforeTheFile) {
     EXPECT_EQ(packageRefusal().offset, size - 16);
 }
 
+TEST_F(FindingATicket, RefusesADamagedTrailerBehindTheTicket) {
+    TrailerFields damaged;
+    damaged.version = 2;
+    put(PackageBuilder().terminator().ticket("the ticket").trailer(damaged));
+    EXPECT_EQ(packageRefusal().message, "a trailer's version is not 1");
+    EXPECT_EQ(packageRefusal().offset, size - 16);
+}
+
 TEST_F(FindingATicket, ReadsNoTicketOfAPackageThatIsLongerThanAnyIs) {
     const std::uint64_t length = 64ULL * 1024 * 1024 + 1;
     const auto record = makeTrailer({.type = 2, .length = static_cast<std::uint32_t>(length)});
