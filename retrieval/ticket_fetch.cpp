@@ -8,6 +8,7 @@
 #include "foundation/hex.h"
 #include "foundation/json.h"
 #include "foundation/value.h"
+#include "retrieval/refused_ticket.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/messages.h"
 #include "src/ticket_record.h"
@@ -76,9 +77,9 @@ void takeTicket(const Answer& answer, FetchedTicket& result, const Platform& pla
              foundation::format("Lumora query for %@ did not return expected JSON data.", result.recordName));
         return;
     }
-    const auto verdict = judgeTicket(
-        ticket, [&] { return hashInRecordName(result.recordName); }, platform.trust);
-    switch (verdict) {
+    const auto hash = hashInRecordName(result.recordName);  // of a name that was looked up
+    switch (judgeTicket(
+        ticket, [&] { return hash; }, platform.trust)) {
         case TicketVerdict::acceptable:
             result.cause = Cause::worked;
             result.exitStatus = kExitOK;
@@ -93,7 +94,8 @@ void takeTicket(const Answer& answer, FetchedTicket& result, const Platform& pla
             return;
         case TicketVerdict::refused:
             fail(result, Cause::notAcceptable, kExitDataError,
-                 foundation::format("Could not validate ticket for %@", result.recordName));
+                 foundation::format("Could not validate ticket for %@: %@.", result.recordName,
+                                    ruleBrokenByTicket(ticket, {*hash}, platform.trust)));
             return;
     }
 }

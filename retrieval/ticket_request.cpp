@@ -11,6 +11,7 @@
 #include "foundation/json.h"
 #include "foundation/value.h"
 #include "retrieval/exchange_failure.h"
+#include "retrieval/refused_ticket.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/messages.h"
 #include "src/record_name.h"
@@ -271,7 +272,8 @@ void TicketRequests::takeIssued(const TicketWish& wish, const Exchange& exchange
                        fetched.recordName));
             break;
         case TicketVerdict::refused:
-            return refuse(foundation::format("Could not validate ticket for %@", fetched.recordName));
+            return refuse(foundation::format("Could not validate ticket for %@: %@.", fetched.recordName,
+                                             ruleBrokenByTicket(ticket, hashes, platform_.trust)));
     }
     fetched.ticket = *std::move(ticket);
     result.action = *action;

@@ -1,3 +1,5 @@
+#include "retrieval/refused_ticket.h"
+#include "retrieval/ticket_fetch.h"
 #include "src/DownloadDelegate.h"
 #include "ticket/artefact.h"
 #include "ticket/commands.h"
@@ -31,6 +33,14 @@ int attach(const Settings& settings, const Platform& platform) {
         report.exitStatus = outcome.exitStatus;
         report.cause = outcome.cause;
         report.messages = run.messages();
+        if (report.cause == retrieval::Cause::notAcceptable) {
+            const auto hash = retrieval::hashInRecordName(report.recordName);
+            const auto ticket = ticketFor(report.recordName);
+            if (hash && ticket)
+                report.messages.push_back("The ticket is not acceptable: " +
+                                          retrieval::ruleBrokenByTicket(*ticket, {*hash}, platform.trust) +
+                                          ".");
+        }
         return report;
     });
 }

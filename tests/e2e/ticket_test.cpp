@@ -314,6 +314,10 @@ TEST_F(TicketTool, AttachJudgesEachTicket) {
     EXPECT_THAT(reportsOf(result), ElementsAre(Reports("worked", 0), Reports("notAcceptable", 65),
                                                Reports("revoked", 77), Reports("notAcceptable", 65),
                                                Reports("notAcceptable", 65), Reports("notIssued", 65)));
+    EXPECT_THAT(result.output,
+                AllOf(HasSubstr("The ticket is not acceptable: the ticket does not list this artefact."),
+                      HasSubstr("The ticket is not acceptable: the signature does not verify."),
+                      HasSubstr("The ticket is not acceptable: the container ends inside its header.")));
     expectValid(result);
     for (std::size_t i = 1; i < images.size(); ++i) EXPECT_EQ(readFile(images[i].path), images[i].contents);
 }

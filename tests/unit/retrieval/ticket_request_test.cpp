@@ -181,6 +181,9 @@ TEST_F(Request, RefusesATicketThatDoesNotListEveryHash) {
     const RequestedTicket result = request(wish);
     EXPECT_EQ(result.fetched.cause, Cause::notAcceptable);
     EXPECT_THAT(result.fetched.ticket, IsEmpty());
+    EXPECT_THAT(result.fetched.messages,
+                ElementsAre("Could not validate ticket for " + nameOf(1) +
+                            ": the ticket does not list every hash of the artefact."));
     EXPECT_EQ(result.action, "");
 }
 
@@ -188,6 +191,19 @@ TEST_F(Request, RefusesATicketThatIsNotGenuine) {
     platform.trust.evaluations = {{.verdict = trust::Verdict::recoverableFailure}};
     issue(1);
     expectEnd(request(wishFor(1)), Cause::notAcceptable, 65);
+}
+
+TEST_F(Request, StatesTheRuleThatARefusedTicketBreaks) {
+    answer(replyOf(issued(1, unsignedTicket({hashOf(2)}))));
+    EXPECT_THAT(request(wishFor(1)).fetched.messages,
+                ElementsAre("Could not validate ticket for " + nameOf(1) +
+                            ": the ticket does not list this artefact."));
+    Data longer = unsignedTicket({hashOf(1)});
+    longer.push_back(std::byte{0});
+    answer(replyOf(issued(1, longer)));
+    EXPECT_THAT(request(wishFor(1)).fetched.messages,
+                ElementsAre("Could not validate ticket for " + nameOf(1) +
+                            ": the lengths of the parts do not add up to the container's."));
 }
 
 TEST_F(Request, KeepsATicketThatRevokes) {
