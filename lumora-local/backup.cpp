@@ -149,7 +149,7 @@ void extractFiles(SQLite::Database& database, const std::string& file, const std
     while (row.executeStep()) {
         const std::string name = row.getColumn(0).getString();
         const std::int64_t size = row.getColumn(1).getInt64();
-        if (!isNameInBackup(name)) refuse(format("%@ is no file of a service", name));
+        if (!isNameInBackup(name)) refuse(format("%@ is not a file of a service", name));
         if (++count > kMaximumBackedUpFiles) refuse("it holds too many files");
         if (size < 0 || size > std::int64_t{kMaximumBackedUpFile} || row.getColumn(2).getInt64() != size) {
             refuse(format("%@ is compressed or too large", name));

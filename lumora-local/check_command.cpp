@@ -143,7 +143,7 @@ class Inspection {
                                  : X509_check_host(server, host.data(), host.size(),
                                                    X509_CHECK_FLAG_NEVER_CHECK_SUBJECT, nullptr) == 1;
         ERR_clear_error();
-        require(covered, format("its certificate does not speak for %@", host));
+        require(covered, format("its certificate does not name %@", host));
     }
 
     /// A service without the administration listener has none of this.

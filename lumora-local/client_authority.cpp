@@ -58,7 +58,7 @@ std::string clientAuthorityPath(const ServiceDirectory& directory) {
 void makeClientCertificate(const ServiceDirectory& directory, const std::string& name,
                            const std::string& folder, foundation::Date now) {
     if (!canNameAClient(name)) {
-        throw Failure(EX_USAGE, format("%@ is no client's name: 1 to %zu bytes without control characters",
+        throw Failure(EX_USAGE, format("%@ is not a client's name: 1 to %zu bytes without control characters",
                                        name, kMaximumClientName));
     }
     const IssuerFiles authority = requireAuthority(directory, now);

@@ -129,7 +129,7 @@ void askForClients(SSL_CTX* context, const std::string& authoritiesFile) {
     require(store != nullptr, "set up TLS");
     for (const CertificateHandle& authority : readCertificateFiles(authoritiesFile, kMaximumAuthorities)) {
         if (X509_check_ca(authority.get()) != 1 || !isWithinBounds(authority.get())) {
-            throw Failure(EX_CONFIG, format("%@ holds a certificate that is no authority's: %@",
+            throw Failure(EX_CONFIG, format("%@ has a certificate that is not an authority's: %@",
                                             authoritiesFile, nameOf(authority.get())));
         }
         require(X509_STORE_add_cert(store.get(), authority.get()) == 1 &&

@@ -153,7 +153,7 @@ RotationReport requestNextSigner(const ServiceDirectory& directory, const std::s
     });
     files.keep();
     return {format("Wrote a request for the signer's certificate to %@.", requestFile),
-            format("Bring it in: lumora-local certify %@ CHAIN", directory.path())};
+            format("Install it with: lumora-local certify %@ CHAIN", directory.path())};
 }
 
 /// Adds a missing root to the platform directory, and reports it.

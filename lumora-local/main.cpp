@@ -91,8 +91,9 @@ void runInit(const Arguments& arguments) {
         "Point pinwell at: PINWELL_PLATFORM=%@\n",
         toString(directory.advertisedEndpoint()), directoryPath, directory.platformPath()));
     if (!service.rootDirectory.empty()) {
-        writeText(foundation::format("The root's key:   %@/root.key (keep it where no service runs)\n",
-                                     service.rootDirectory));
+        writeText(
+            foundation::format("The root's key:   %@/root.key (keep it on a machine without a service)\n",
+                               service.rootDirectory));
     }
     if (!service.signerRequest.empty()) {
         writeText(
@@ -185,7 +186,7 @@ void runLog(Arguments& arguments) {
     if (!arguments.since.empty()) {
         query.since = parseRfc3339(arguments.since);
         if (!query.since) {
-            throw Failure(EX_USAGE, foundation::format("%@ is no time: 2026-11-20 or 2026-11-20T19:55:00Z",
+            throw Failure(EX_USAGE, foundation::format("%@ is not a time: 2026-11-20 or 2026-11-20T19:55:00Z",
                                                        arguments.since));
         }
     }
@@ -289,10 +290,10 @@ void declareIssue(CLI::App& issue, Arguments& arguments) {
     issue.add_option("ARTEFACT", arguments.subjects, "A bundle, disk image or package");
     issue
         .add_option("--record", arguments.recordNames,
-                    "The name of a record, for an artefact that is not here: 2/2/HEX")
+                    "The name of a record, for an artefact on another machine: 2/2/HEX")
         ->allow_extra_args(false);
-    issue.add_option("--label", arguments.label, "What the --record is for (default: its name)");
-    issue.add_flag("--asset", arguments.asAsset, "Deliver by download (always so above 1 MiB)");
+    issue.add_option("--label", arguments.label, "The label of the --record (default: its name)");
+    issue.add_flag("--asset", arguments.asAsset, "Deliver by download, as for every ticket over 1 MiB");
     issue.add_flag("--reinstate", arguments.reinstates, "Make revoked records valid again; needs --comment");
     addComment(issue, arguments);
     addJson(issue, arguments);
@@ -301,8 +302,8 @@ void declareIssue(CLI::App& issue, Arguments& arguments) {
 
 void declareRevoke(CLI::App& revoke, Arguments& arguments) {
     revoke.add_option("ARTEFACT|RECORDNAME", arguments.subjects,
-                      "What was issued, or the name of its record");
-    revoke.add_option("--reason", arguments.reason, "Why, for the log")
+                      "An issued artefact, or the name of its record");
+    revoke.add_option("--reason", arguments.reason, "The reason, for the log")
         ->check(CLI::IsMember(reasonNames()))
         ->capture_default_str();
     addComment(revoke, arguments);
@@ -317,7 +318,7 @@ void declareLog(CLI::App& log, Arguments& arguments) {
     addJson(log, arguments);
     log.add_flag("--verify", arguments.verifies, "Check the whole log; 78 if it is broken");
     log.add_option("--head", arguments.head,
-                   "Print the hash of the last event; with --verify: an event that must be there")
+                   "Print the hash of the last event; with --verify: an event that the log must have")
         ->expected(0, 1);
 }
 
@@ -333,19 +334,19 @@ void declareCommands(CLI::App& app, Arguments& arguments) {
         return command;
     };
     CLI::App* init = add("init", "Make a service: keys, certificates, an empty store",
-                         "The directory to make; nothing that exists is overwritten", runInit);
+                         "The new directory, empty or missing", runInit);
     init->add_option("--host", arguments.hosts,
-                     "A DNS name or address the service goes by (default: localhost, 127.0.0.1, ::1)")
+                     "A DNS name or address of the service (default: localhost, 127.0.0.1, ::1)")
         ->allow_extra_args(false);
-    init->add_option("--port", arguments.port, "The port clients are sent to")
+    init->add_option("--port", arguments.port, "The port for clients")
         ->check(CLI::Range(1, 65535))
         ->capture_default_str();
     init->add_option("--passphrase-file", arguments.passphraseFile,
                      "Encrypt the keys with the first line of this file, or credential:NAME");
     init->add_option("--root-out", arguments.rootDirectory,
-                     "A directory to make for the root's key, which is then not in the service");
+                     "A new directory for the root's key, outside of the service");
     init->add_option("--signer-csr", arguments.signerRequest,
-                     "A file to make: a request, for a signer that another authority certifies");
+                     "A new file: a request to another authority for the signer's certificate");
 
     declareIssue(*add("issue", "Issue a ticket for each artefact", kServiceHelp, runIssue), arguments);
     declareRevoke(*add("revoke", "Replace issued tickets by revoked ones", kServiceHelp, runRevoke),
@@ -355,34 +356,34 @@ void declareCommands(CLI::App& app, Arguments& arguments) {
     addJson(*list, arguments);
     addEnvironment(*list, arguments);
 
-    declareLog(*add("log", "Show what was done to the records, or check it", kServiceHelp, runLog),
-               arguments);
+    declareLog(*add("log", "Show the log of changes, or check it", kServiceHelp, runLog), arguments);
 
     add("migrate", "Move the records into a PostgreSQL database", kServiceHelp, runMigrate)
         ->add_option("--to", arguments.to, "Its URL: postgresql://...");
 
-    add("sample", "Write a sample of each kind of artefact", "Where to write them", runSample);
+    add("sample", "Write a sample of each kind of artefact", "The directory for them", runSample);
 
     CLI::App* serve =
-        add("serve", "Answer lookups over HTTPS until SIGTERM or SIGINT", kServiceHelp, runServe);
+        add("serve", "Serve lookups over HTTPS until SIGTERM or SIGINT", kServiceHelp, runServe);
     serve->add_option("--listen", arguments.listen,
-                      "ADDRESS:PORT instead of what platform.json says; port 0: any free one");
+                      "ADDRESS:PORT instead of the host in platform.json; port 0: any free one");
     serve->add_option("--metrics-listen", arguments.metricsListen,
                       "ADDRESS:PORT for metrics over plain HTTP, for Prometheus (default: none)");
     serve->add_option("--admin-listen", arguments.adminListen,
                       "ADDRESS:PORT where clients with certificates issue and revoke; needs --client-ca");
     serve->add_option("--client-ca", arguments.clientAuthorities,
-                      "PEM file: the authorities that those clients have their certificates from");
-    serve->add_option("--ready-file", arguments.readyFile, "Gets the service's URL once it listens");
+                      "PEM file: the authorities of those clients' certificates");
+    serve->add_option("--ready-file", arguments.readyFile,
+                      "A file for the service's URL, written once it listens");
     serve->add_flag("--update-platform", arguments.updatePlatform,
-                    "Let platform.json name this very service");
+                    "Write the service's host and port into platform.json");
     declareUpkeepVerbs(app, arguments.upkeep);
     app.require_subcommand(1);
 }
 
 int run(int argc, char** argv) {
     Arguments arguments;
-    CLI::App app("A record service of one's own: issues tickets for artefacts and answers lookups for them.",
+    CLI::App app("A record service: issues tickets for artefacts and serves lookups for them.",
                  "lumora-local");
     app.set_version_flag("--version", companion::versionText("lumora-local"));
     declareCommands(app, arguments);

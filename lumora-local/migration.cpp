@@ -97,7 +97,7 @@ Migration migrate(const ServiceDirectory& directory, const std::string& url) {
         }
         PostgresStore destination(place);
         if (summarize(destination) != wanted) {
-            throw Failure(EX_SOFTWARE, "the copy is not what was copied; the service keeps its old store");
+            throw Failure(EX_SOFTWARE, "the copy differs from the original; the service keeps its old store");
         }
         verifyHistory(destination, history.head);
         confirm();

@@ -68,7 +68,7 @@ class ManagedRun {
     }
 
     void ready(const Endpoint& endpoint) const {
-        manager_.tell(format("READY=1\nSTATUS=Answers lookups at https://%@", toString(endpoint)));
+        manager_.tell(format("READY=1\nSTATUS=Serves lookups at https://%@", toString(endpoint)));
     }
 
     /// Runs on a thread that serves requests: if all of them are stuck, no notification is sent.
@@ -89,7 +89,7 @@ void announce(const ServiceDirectory& directory, const ServeOptions& options, co
               const Endpoint& endpoint) {
     const auto& hosts = directory.hosts();
     if (std::find(hosts.begin(), hosts.end(), endpoint.host) == hosts.end()) {
-        output.err(format("the service's certificate does not speak for %@: clients will refuse it there",
+        output.err(format("the service's certificate does not name %@: clients will refuse it there",
                           endpoint.host));
     }
     if (options.updatePlatform) directory.advertise(endpoint);
@@ -114,7 +114,7 @@ void announce(const ServiceDirectory& directory, const AdminListener& admin, con
     const Endpoint endpoint = reachable(directory, admin.endpoint());
     const auto& hosts = directory.hosts();
     if (std::find(hosts.begin(), hosts.end(), endpoint.host) == hosts.end()) {
-        output.err(format("the service's certificate does not speak for %@: clients will refuse it there",
+        output.err(format("the service's certificate does not name %@: clients will refuse it there",
                           endpoint.host));
     }
     output.out(format("administration at https://%@", toString(endpoint)));

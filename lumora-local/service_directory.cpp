@@ -186,7 +186,7 @@ ServiceDirectory ServiceDirectory::open(const std::string& path) {
     const std::string description = path + "/service/service.json";
     const Result<Data> bytes = foundation::readSmallFile(description, kMaximumDescriptionSize);
     if (!bytes) {
-        throw Failure(EX_NOINPUT, format("%@ holds no record service that can be read: %@", path,
+        throw Failure(EX_NOINPUT, format("%@ has no readable record service: %@", path,
                                          bytes.error().localizedDescription()));
     }
     return {path, parseServiceSettings(parseJson(*bytes, description), description)};

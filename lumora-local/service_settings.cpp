@@ -26,7 +26,7 @@ class SettingsObject {
     SettingsObject(const Value& value, const std::string& path, std::string name)
         : value_(value), path_(path), name_(std::move(name)) {
         if (value_.dictionary() == nullptr) {
-            if (name_.empty()) throw Failure(EX_CONFIG, format("%@ holds no JSON object", path_));
+            if (name_.empty()) throw Failure(EX_CONFIG, format("%@ is not a JSON object", path_));
             complain(name_.substr(0, name_.size() - 1), "is not an object");
         }
     }

@@ -91,7 +91,7 @@ StoreGuard makeGuard(const ServiceDirectory& directory) {
 void requireChangesAllowed(const ServiceDirectory& directory) {
     if (directory.role() != Role::lookup) return;
     throw Failure(EX_CONFIG,
-                  format("%@: \"role\" is lookup: this service answers lookups and changes no records",
+                  format("%@: \"role\" is lookup: this service serves lookups and changes no records",
                          directory.descriptionPath()));
 }
 

@@ -44,7 +44,7 @@ void runRotate(UpkeepVerbs& verbs) {
         throw Failure(EX_USAGE, "--signer-csr makes a key of its own and does not go with --key");
     }
     if (!verbs.key.empty() && !isTokenKey(verbs.key)) {
-        throw Failure(EX_USAGE, format("%@ is no pkcs11: URI", verbs.key));
+        throw Failure(EX_USAGE, format("%@ is not a pkcs11: URI", verbs.key));
     }
     print(rotateSigner(directory, {verbs.key, verbs.requestFile}, Date::now()));
 }
@@ -64,13 +64,14 @@ void runClientCertificate(UpkeepVerbs& verbs) {
     writeText(
         format("Made %@/client.pem and %@/client.key for %@.\n"
                "Give it roles in:  %@/service/access.toml\n"
-               "Let it in with:    serve --admin-listen ADDRESS:PORT --client-ca %@\n",
+               "Admit it with:     serve --admin-listen ADDRESS:PORT --client-ca %@\n",
                verbs.out, verbs.out, verbs.words[0], directory.path(), clientAuthorityPath(directory)));
 }
 
 void runCheck(UpkeepVerbs& verbs) {
     const auto warning = parseDuration(verbs.warning);
-    if (!warning) throw Failure(EX_USAGE, format("%@ is no length of time: 12h, 30d or 8w", verbs.warning));
+    if (!warning)
+        throw Failure(EX_USAGE, format("%@ is not a length of time: 12h, 30d or 8w", verbs.warning));
     const ServiceDirectory directory = ServiceDirectory::open(requireDirectory(verbs.directory));
     const std::vector<Finding> findings = checkService(directory, Date::now(), *warning);
     writeText(describeFindings(findings));
@@ -97,42 +98,42 @@ constexpr const char* kServiceHelpText = "The service (default: $LUMORA_DIR)";
 void declareUpkeepVerbs(CLI::App& app, UpkeepVerbs& verbs) {
     CLI::App* rotate = app.add_subcommand("rotate", "Replace the key of the signer or the server");
     rotate->add_option("DIR", verbs.directory, kServiceHelpText);
-    rotate->add_option("signer|server", verbs.words, "Whose key");
+    rotate->add_option("signer|server", verbs.words, "The key to replace");
     rotate->add_option("--key", verbs.key, "signer: a pkcs11: URI of the key to use");
     rotate->add_option("--signer-csr", verbs.requestFile,
-                       "signer: a file to make, a request for a certificate from another authority");
-    rotate->add_option("--root", verbs.rootDirectory, "server: the directory that root.key is in");
+                       "signer: a new file, a request to another authority for a certificate");
+    rotate->add_option("--root", verbs.rootDirectory, "server: the directory with root.key");
     rotate->callback([&verbs] { runRotate(verbs); });
 
     CLI::App* certify =
-        app.add_subcommand("certify", "Bring in a signer's certificate from another authority");
+        app.add_subcommand("certify", "Install a signer's certificate from another authority");
     certify->add_option("DIR", verbs.directory, kServiceHelpText);
     certify->add_option("CHAIN", verbs.words,
                         "A PEM file: the certificates of signer, intermediate and root");
-    certify->add_option("--key", verbs.key, "The key that was certified, a file or a pkcs11: URI");
+    certify->add_option("--key", verbs.key, "The certified key, a file or a pkcs11: URI");
     certify->callback([&verbs] { runCertify(verbs); });
 
     CLI::App* client =
         app.add_subcommand("client-certificate", "Make a certificate for a client of the admin listener");
     client->add_option("DIR", verbs.directory, kServiceHelpText);
     client->add_option("NAME", verbs.words, "The client's name, as in access.toml");
-    client->add_option("--out", verbs.out, "The directory to make, with client.pem and client.key");
+    client->add_option("--out", verbs.out, "The new directory, with client.pem and client.key");
     client->callback([&verbs] { runClientCertificate(verbs); });
 
-    CLI::App* check = app.add_subcommand("check", "Look keys, certificates and records over");
+    CLI::App* check = app.add_subcommand("check", "Check keys, certificates and records");
     check->add_option("DIR", verbs.directory, kServiceHelpText);
-    check->add_option("--warn", verbs.warning, "How long before its end a certificate is complained about")
+    check->add_option("--warn", verbs.warning, "Report a certificate that expires within this time")
         ->capture_default_str();
     check->callback([&verbs] { runCheck(verbs); });
 
     CLI::App* backup = app.add_subcommand("backup", "Write the whole service into one file, while it runs");
     backup->add_option("DIR", verbs.directory, kServiceHelpText);
-    backup->add_option("FILE", verbs.words, "The file to make");
+    backup->add_option("FILE", verbs.words, "The new file");
     backup->callback([&verbs] { runBackup(verbs); });
 
-    CLI::App* restore = app.add_subcommand("restore", "Make a service from such a file");
-    restore->add_option("FILE", verbs.file, "What backup has made");
-    restore->add_option("DIR", verbs.directory, "The directory to make (default: $LUMORA_DIR)");
+    CLI::App* restore = app.add_subcommand("restore", "Make a service from a backup");
+    restore->add_option("FILE", verbs.file, "A file made by backup");
+    restore->add_option("DIR", verbs.directory, "The new directory (default: $LUMORA_DIR)");
     restore->callback([&verbs] { runRestore(verbs); });
 }
 

@@ -376,7 +376,7 @@ TEST_F(AdminStartTest, NeedsAnAccessListThatCanBeUsed) {
 }
 
 TEST_F(AdminStartTest, NeedsCertificatesOfAuthorities) {
-    expectRefused(both(service_.folderOf("manager") + "/client.pem"), 78, "no authority's: manager");
+    expectRefused(both(service_.folderOf("manager") + "/client.pem"), 78, "not an authority's: manager");
     expectRefused(both(service_.accessPath()), 78, "there is no certificate in");
     expectRefused(both(service_.scratch("nothing")), 66, "nothing");
 }

@@ -299,7 +299,7 @@ TEST_F(Keys, AreCheckedWithTheStoreAndThePlatform) {
     const ServiceDirectory directory = open();
     directory.advertise({"elsewhere.example", 8443});
     EXPECT_EQ(check(), EX_CONFIG);
-    EXPECT_NE(last_.find("does not speak for elsewhere.example"), std::string::npos) << last_;
+    EXPECT_NE(last_.find("does not name elsewhere.example"), std::string::npos) << last_;
     directory.advertise({"localhost", 8443});
     EXPECT_EQ(check(), 0) << last_;
     writeFile(directory.storePath(), "no database");

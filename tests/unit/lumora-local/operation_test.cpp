@@ -126,7 +126,7 @@ TEST(ServiceManagerMessages, TellOfReadinessAndTheEnd) {
     const ManagerSocket manager(directory / "notify");
     const ScopedVariable variable("NOTIFY_SOCKET", directory / "notify");
     RunningService service;
-    EXPECT_TRUE(manager.next().starts_with("READY=1\nSTATUS=Answers lookups at https://127.0.0.1:"));
+    EXPECT_TRUE(manager.next().starts_with("READY=1\nSTATUS=Serves lookups at https://127.0.0.1:"));
     service.sendSignal(SIGTERM);
     EXPECT_EQ(manager.next(), "STOPPING=1");
     EXPECT_EQ(service.wait(), 0);
