@@ -41,11 +41,21 @@ bool isClientsFault(int status) {
 
 }  // namespace
 
-const AdminRoute& AdminService::routeOf(const RequestHead& head) const {
+const AdminRoute* AdminService::findRoute(const RequestHead& head) const {
     const std::string_view path = pathOf(head.target);
     for (const AdminRoute& route : routes_) {
-        if (fits(route, path, head.method)) return route;
+        if (fits(route, path, head.method)) return &route;
     }
+    return nullptr;
+}
+
+Answer AdminService::refusal(int status, std::string_view detail, const RequestHead& head) const {
+    const AdminRoute* const route = findRoute(head);
+    return route != nullptr && route->refuse ? route->refuse(status, detail, head) : problem(status, detail);
+}
+
+const AdminRoute& AdminService::routeOf(const RequestHead& head) const {
+    if (const AdminRoute* const route = findRoute(head)) return *route;
     const std::string methods = allowedAt(head);
     if (methods.empty()) throw Refused(404, "there is nothing at this path");
     throw Refused(405, format("the method here is %s", methods));
@@ -74,7 +84,9 @@ AdminRequest AdminService::admit(const RequestHead& head, const AdminRoute& rout
 
 std::optional<Answer> AdminService::answerHead(const RequestHead& head) const {
     if (const auto seconds = rates_.take(head.client)) {
-        return withCommonHeaders(problemForNow(429, "too many requests of this client", *seconds));
+        Answer answer = refusal(429, "too many requests of this client", head);
+        answer.headers.emplace_back("Retry-After", std::to_string(*seconds));
+        return withCommonHeaders(std::move(answer));
     }
     try {
         const AdminRoute& route = routeOf(head);
@@ -83,7 +95,7 @@ std::optional<Answer> AdminService::answerHead(const RequestHead& head) const {
         return withCommonHeaders(route.handle(request));
     } catch (const Refused& refused) {
         note(head, refused.status(), refused.what(), {});
-        Answer answer = problem(refused.status(), refused.what());
+        Answer answer = refusal(refused.status(), refused.what(), head);
         if (refused.status() == 405) answer.headers.emplace_back("Allow", allowedAt(head));
         return withCommonHeaders(std::move(answer));
     }

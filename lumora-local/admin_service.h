@@ -36,6 +36,9 @@ struct AdminRoute {
 
     /// From any thread, several at a time. Throws Refused; any other exception becomes 503.
     std::function<Answer(const AdminRequest&)> handle;
+
+    /// A refusal in the form that this path's clients read. Empty: problem().
+    std::function<Answer(int status, std::string_view detail, const RequestHead& head)> refuse{};
 };
 using AdminRoutes = std::vector<AdminRoute>;
 
@@ -52,7 +55,9 @@ class AdminService final : public HttpService {
     RequestKind kindOf(std::string_view) const override { return RequestKind::administration; }
 
   private:
+    const AdminRoute* findRoute(const RequestHead& head) const;
     const AdminRoute& routeOf(const RequestHead& head) const;
+    Answer refusal(int status, std::string_view detail, const RequestHead& head) const;
     std::string allowedAt(const RequestHead& head) const;
     AdminRequest admit(const RequestHead& head, const AdminRoute& route) const;
     void note(const RequestHead& head, int status, std::string_view detail, std::string_view body) const;

@@ -143,6 +143,11 @@ Answer answerStyle() {
     return answer;
 }
 
+Answer refusePage(int status, std::string_view detail, const RequestHead& head) {
+    return pageAnswer(status, faultPage("There is nothing to show", format("The reason: %s.", detail),
+                                        SearchForm{}, head.client));
+}
+
 }  // namespace
 
 AdminRoutes pageRoutes(RecordStore& store) {
@@ -150,17 +155,20 @@ AdminRoutes pageRoutes(RecordStore& store) {
              "/",
              &Rights::read,
              {},
-             [&store](const AdminRequest& request) { return answerHome(store, request); }},
+             [&store](const AdminRequest& request) { return answerHome(store, request); },
+             refusePage},
             {"GET",
              "/records",
              &Rights::read,
              {"by", "text", "environment", "after"},
-             [&store](const AdminRequest& request) { return answerResults(store, request); }},
+             [&store](const AdminRequest& request) { return answerResults(store, request); },
+             refusePage},
             {"GET",
              "/records/*",
              &Rights::read,
              {"environment", "after"},
-             [&store](const AdminRequest& request) { return answerRecord(store, request); }},
+             [&store](const AdminRequest& request) { return answerRecord(store, request); },
+             refusePage},
             {"GET", "/style.css", &Rights::read, {}, [](const AdminRequest&) { return answerStyle(); }}};
 }
 

@@ -38,10 +38,18 @@ class AdminServiceTest : public testing::Test {
         const auto failing = [](const AdminRequest&) -> Answer {
             throw Failure(EX_IOERR, "the disk is gone");
         };
+        const auto inWords = [](int status, std::string_view detail, const RequestHead&) {
+            Answer answer;
+            answer.status = status;
+            answer.contentType = "text/plain";
+            answer.body = detail;
+            return answer;
+        };
         service_ =
             std::make_unique<AdminService>(AdminRoutes{{"GET", "/things", &Rights::read, {"a", "b"}, handled},
                                                        {"POST", "/things", &Rights::issue, {}, handled},
                                                        {"GET", "/pages/*", &Rights::read, {}, handled},
+                                                       {"GET", "/words", &Rights::read, {}, handled, inWords},
                                                        {"GET", "/failing", &Rights::read, {}, failing}},
                                            *access_, *rates_, *refusals_);
     }
@@ -122,6 +130,20 @@ TEST_F(AdminServiceTest, LooksAtTheRolesAgainOnceTheBodyIsThere) {
     access_->reload();
     EXPECT_EQ(service_->answerBody(post, "{}").status, 403);
     EXPECT_EQ(seen_, "");
+}
+
+TEST_F(AdminServiceTest, RefusesInTheFormOfThePath) {
+    const auto forbidden = service_->answerHead(head("GET", "/words", "issuer"));
+    ASSERT_TRUE(forbidden);
+    EXPECT_EQ(forbidden->status, 403);
+    EXPECT_EQ(forbidden->contentType, "text/plain");
+    EXPECT_EQ(forbidden->body, "access.toml does not give issuer the role read");
+    EXPECT_EQ(headerOf(*forbidden, "Cache-Control"), "no-store");
+    std::optional<Answer> answer;
+    for (int i = 0; i < 6; ++i) answer = service_->answerHead(head("GET", "/words", "reader"));
+    EXPECT_EQ(answer->status, 429);
+    EXPECT_EQ(answer->contentType, "text/plain");
+    EXPECT_NE(headerOf(*answer, "Retry-After"), "");
 }
 
 TEST_F(AdminServiceTest, KnowsItsPathsAndMethods) {

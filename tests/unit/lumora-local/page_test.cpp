@@ -281,6 +281,20 @@ TEST_F(PageRoutes, AnswerWithAStrictPolicy) {
     EXPECT_EQ(get("/style.css").body, pageStyle());
 }
 
+TEST_F(PageRoutes, ShowARefusalAsAPage) {
+    RequestHead head;
+    head.client = kClient;
+    for (const AdminRoute& route : pageRoutes(*store_)) {
+        if (route.path == "/style.css") continue;
+        ASSERT_TRUE(route.refuse) << route.path;
+        const Answer answer = route.refuse(403, "no role <read>", head);
+        EXPECT_EQ(answer.status, 403);
+        EXPECT_EQ(answer.contentType, "text/html; charset=utf-8");
+        EXPECT_THAT(answer.body, HasSubstr("no role &lt;read&gt;"));
+        EXPECT_THAT(headerOf(answer, "Content-Security-Policy"), HasSubstr("default-src 'none'"));
+    }
+}
+
 TEST_F(PageRoutes, CountRecordsAndEvents) {
     EXPECT_THAT(body("/"), HasSubstr("<dt>Records</dt><dd>0</dd>"));
     put(1, "App");
