@@ -61,9 +61,7 @@ TEST(JSON, LetsTheLastOfEqualKeysWin) {
 }
 
 TEST(JSON, RefusesEqualKeysOnRequest) {
-    const auto refused = [](std::string_view text) {
-        return !parseJSON(asBytes(text), EqualKeys::refused);
-    };
+    const auto refused = [](std::string_view text) { return !parseJSON(asBytes(text), EqualKeys::refused); };
     EXPECT_TRUE(refused(R"({"a":1,"a":2})"));
     EXPECT_TRUE(refused(R"([{"a":{"b":1,"c":2,"\u0062":1}}])"));
     EXPECT_FALSE(refused(R"([{"a":{"a":1}},{"a":2}])"));
