@@ -1,4 +1,4 @@
-// Lookups in progress: groups of items at the record service, each on a thread of its own.
+// Lookups in progress: groups of items at the record service, each on its own thread.
 #pragma once
 
 #include <functional>
@@ -21,7 +21,7 @@ class Lookups {
   public:
     using Take = std::function<void(std::vector<ItemRef> group, std::vector<retrieval::Answer> answers)>;
 
-    /// `take` gets each group with its answers, on a thread of this object's own.
+    /// `take` gets each group with its answers, on a thread of this object.
     Lookups(const Platform& platform, Take take);
 
     /// Cancels the running lookups, and waits for them.

@@ -1,8 +1,8 @@
 // Why a ticket is refused: the one home of the reasons.
 //
-// satchel_get_validated_tm_ticket decides and says nothing. These functions take its steps again, in its
-// order, and return the first rule that is broken. The companions and the library state what is returned
-// here, and have no rules of their own.
+// satchel_get_validated_tm_ticket decides, without giving a reason. These functions repeat its steps in its
+// order, and return the first broken rule. The companions and the library report this rule, and have no
+// rules of their own.
 #pragma once
 
 #include <cstdint>

@@ -23,7 +23,7 @@ class Reporter {
     /// One artefact, or one record.
     void report(const retrieval::Report& report);
 
-    /// A line of its own, in place of a report that worked.
+    /// A separate line, instead of the report of a success.
     void line(const std::string& text, int exitStatus);
 
     /// Something that is wrong with the whole run: said on standard error.

@@ -8,11 +8,11 @@
 
 namespace pinwell::ticket_files {
 
-/// A new file, on stable storage when this returns. What is there already stays as it is (EEXIST). A failed
-/// write leaves nothing there.
+/// Makes a new file, and returns after it is on stable storage. An existing file stays unchanged (EEXIST).
+/// After a failed write there is no file.
 foundation::Result<void> writeNewFile(foundation::ByteView contents, const std::string& path);
 
-/// The same, in the place of what is there, as a whole or not at all.
+/// The same, but replaces an existing file, completely or not at all.
 foundation::Result<void> replaceFile(foundation::ByteView contents, const std::string& path);
 
 }  // namespace pinwell::ticket_files

@@ -12,14 +12,14 @@ namespace pinwell::ticket_files {
 
 class TicketDirectory {
   public:
-    /// Makes it if it is not there, and reads its index. The error says what cannot be done.
+    /// Makes a missing directory, and reads its index. The error names the failed action.
     static foundation::Result<TicketDirectory> open(const std::string& path);
 
-    /// Writes the ticket to the file of its record, in the place of an earlier one, and says so in the
-    /// report: its file, a message, and the failure if it could not be written.
+    /// Writes the ticket to the file of its record, and replaces an earlier one. Adds the result to the
+    /// report: the file, a message, and the failure if it could not be written.
     void keep(const retrieval::FetchedTicket& ticket, retrieval::Report& report);
 
-    /// Writes the index. The error says what cannot be done.
+    /// Writes the index. The error names the failed action.
     foundation::Result<void> close() const;
 
   private:

@@ -1,5 +1,5 @@
-// Why no ticket can be read from an artefact: the reasons that lie in the place of the ticket, not in the
-// ticket itself (explain_ticket.h has those).
+// Why no ticket can be read from an artefact: the faults of the ticket's place. explain_ticket.h has the
+// faults of the ticket itself.
 //
 // The place of a ticket is the file Contents/CodeResources of a bundle, a blob of a disk image's superblob,
 // or a trailer of a flat package.
