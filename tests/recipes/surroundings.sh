@@ -3,6 +3,8 @@
 #   PROGRAMS   the folder of pinwell and lumora-local
 #   PAGE       the page with the recipes
 #
+# The variable RECIPE_SAMPLES names a folder with a sample of every kind.
+#
 # Makes a temporary directory and changes to it. At the end it ends the service and removes the directory. The directory has
 # the recipes' surroundings: release/ with a sample of every kind, and staple-and-validate from the page.
 # shellcheck shell=bash
@@ -64,10 +66,15 @@ wait_for() {
   until "$@"; do command -p sleep 0.05; done
 }
 
+# make_samples FOLDER: copies the samples, which are made once for all tests of the recipes.
+make_samples() {
+  cp -R "$RECIPE_SAMPLES" "$1"
+}
+
 make_service() {
   # Nobody listens on port 1, so the service is unreachable until it starts.
   lumora-local init --host 127.0.0.1 --port 1 service > /dev/null
-  lumora-local sample release > /dev/null
+  make_samples release
   export PINWELL_PLATFORM=$work/service/platform
 }
 
