@@ -8,6 +8,7 @@
 #include <string>
 
 #include "fixed_now.h"
+#include "kept_rsa_keys.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/samples.h"
@@ -66,6 +67,7 @@ void writeAllSamples(const std::string& directory) {
 const std::set<std::string> kAllSamples{"Sample.app", "Sample.dmg", "Sample.pkg", "Unsigned.dmg"};
 
 TEST(Samples, AreAllThereOrNoneWhicheverCallFails) {
+    const KeptRsaKeys keys;
     EXPECT_THAT(failEachCall([](std::size_t number) { return Trouble::atCall(number, EIO); }, writeAllSamples,
                              kAllSamples),
                 IsSupersetOf({"open", "write", "fsync"}));
