@@ -32,11 +32,10 @@ std::string elementOf(const std::string& name, const std::string& text) {
 }  // namespace
 
 Data deflated(ByteView contents) {
-    std::vector<Bytef> in(contents.size());
-    for (std::size_t i = 0; i < in.size(); ++i) in[i] = std::to_integer<Bytef>(contents[i]);
-    uLongf length = compressBound(static_cast<uLong>(in.size()));
+    const auto size = static_cast<uLong>(contents.size());
+    uLongf length = compressBound(size);
     std::vector<Bytef> out(length);
-    if (compress(out.data(), &length, in.data(), static_cast<uLong>(in.size())) != Z_OK)
+    if (compress(out.data(), &length, reinterpret_cast<const Bytef*>(contents.data()), size) != Z_OK)
         throw std::runtime_error("cannot compress");
     return foundation::toData(std::as_bytes(std::span(out)).first(length));
 }
@@ -107,7 +106,7 @@ Data ArchiveBuilder::build() const {
     writer.be64(uncompressedLength_.value_or(document().size()));
     writer.be32(algorithm_.value_or(digestNumber())).bytes(headerTail_);
     writer.bytes(toc);
-    writer.bytes(beforeChecksum_).bytes(checksum_.value_or(rightChecksum())).bytes(afterChecksum_);
+    writer.bytes(beforeChecksum_).bytes(checksum_.value_or(digestOf(digest_, toc))).bytes(afterChecksum_);
     return std::move(writer).take();
 }
 

@@ -1,13 +1,20 @@
 #include "support/volume.h"
 
+#include <fcntl.h>
 #include <sched.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <cstdint>
 #include <cstdlib>
+#include <filesystem>
 #include <stdexcept>
 #include <string_view>
+#include <system_error>
+#include <utility>
+
+#include "foundation/file_io.h"
 
 namespace pinwell::test {
 namespace {
@@ -17,6 +24,26 @@ using namespace std::string_view_literals;
 bool runs(const std::string& command) {
     return std::system((command + " >/dev/null 2>&1").c_str()) == 0;  // NOLINT: a test's own fixed commands
 }
+
+constexpr std::uintmax_t kRoomInMemory = std::uintmax_t{2} << 30U;  // bytes, for several volumes at once
+
+/// A new file, in memory if there is room: a flush of the volume then waits for no disk. It needs no name
+/// after the mount.
+struct BackingFile {
+    explicit BackingFile(std::string onDisk) : path(std::move(onDisk)) {
+        std::error_code none;
+        const std::filesystem::space_info memory = std::filesystem::space("/dev/shm", none);
+        if (none || memory.available < kRoomInMemory) return;
+        std::string pattern = "/dev/shm/pinwell-volume-XXXXXX";
+        const foundation::FileDescriptor file(mkostemp(pattern.data(), O_CLOEXEC));
+        if (file) path = pattern;
+    }
+    ~BackingFile() { ::unlink(path.c_str()); }
+    BackingFile(const BackingFile&) = delete;
+    BackingFile& operator=(const BackingFile&) = delete;
+
+    std::string path;
+};
 
 }  // namespace
 
@@ -38,7 +65,8 @@ Volume::Volume(const std::string& fileSystem) : path_(directory_ / "volume") {
         if (mount("none", path_.c_str(), "tmpfs", 0, "size=1m") != 0) missing_ = "tmpfs cannot be mounted";
         return;
     }
-    const std::string image = directory_ / "image";
+    const BackingFile file(directory_ / "image");
+    const std::string& image = file.path;
     const std::string_view kind = std::string_view(fileSystem).substr(0, fileSystem.find(' '));
     const std::string make =
         "mkfs." + fileSystem + (kind == "btrfs" ? " -q --nodiscard " : " -q -K ") + image;
