@@ -5,7 +5,7 @@
 #include "codesign/code_error.h"
 #include "codesign/disk_image_trailer.h"
 #include "codesign/superblob.h"
-#include "foundation/byte_reader.h"
+#include "formats/udif_header.h"
 #include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "verify/block_table.h"
@@ -53,15 +53,14 @@ void checkSigned(const ByteSource& source, const DiskImageTrailer& trailer, cons
 /// bytes.
 bool wasDiskImage(const ByteSource& source) {
     constexpr std::uint64_t kTailSize = 8192;
-    constexpr std::uint32_t kVersion = 4;
     const auto length = static_cast<std::size_t>(std::min(kTailSize, source.size()));
     const Data tail = source.read(source.size() - length, length);
     const ByteView magic = foundation::asBytes("koly");
     if (std::search(tail.begin(), tail.end(), magic.begin(), magic.end()) != tail.end()) return true;
-    if (tail.size() < codesign::kTrailerSize) return false;
-    foundation::ByteReader reader(ByteView(tail).last(codesign::kTrailerSize));
-    reader.skip(4, "magic");
-    return reader.be32("version") == kVersion && reader.be32("header size") == codesign::kTrailerSize;
+    if (tail.size() < kUDIFHeaderSize) return false;
+    UDIFFileHeader header;
+    header.assign(ByteView(tail).last(kUDIFHeaderSize));
+    return header.version() == kUDIFVersion && header.headerSize() == kUDIFHeaderSize;
 }
 
 VerifiedCode verified(const ByteSource& source, Workers& workers, Section& section) {

@@ -1,22 +1,13 @@
-// The trailer of a disk image, as far as its signature needs it. 512 bytes at the very end of the file; all
-// integers are big-endian.
-//
-// | Offset | Size | Field                                     |
-// |--------|------|-------------------------------------------|
-// | 0      | 4    | "koly"                                    |
-// | 4      | 4    | version, 4                                |
-// | 296    | 8    | signature offset, 0 if unsigned           |
-// | 304    | 8    | signature length, 0 if unsigned           |
+// The trailer of a disk image (formats/udif_header.h), as far as its signature needs it.
 #pragma once
 
 #include <cstdint>
 #include <optional>
 
 #include "codesign/executable_image.h"
+#include "formats/udif_header.h"
 
 namespace pinwell::codesign {
-
-inline constexpr std::size_t kTrailerSize = 512;
 
 /// The special slot of a code directory that covers the trailer.
 inline constexpr std::uint32_t kSlotTrailer = 6;
@@ -43,9 +34,9 @@ class DiskImageTrailer {
     Data canonicalBytes() const;
 
   private:
-    DiskImageTrailer(Data bytes, std::uint64_t offset) : bytes_(std::move(bytes)), offset_(offset) {}
+    DiskImageTrailer(const UDIFFileHeader& header, std::uint64_t offset) : header_(header), offset_(offset) {}
 
-    Data bytes_;
+    UDIFFileHeader header_;
     std::uint64_t offset_;
 };
 

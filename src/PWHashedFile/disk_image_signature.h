@@ -1,4 +1,4 @@
-// The place and the contents of a disk image's signature: trailer (udif_header.h), then superblob
+// The place and the contents of a disk image's signature: trailer (formats/udif_header.h), then superblob
 // (blob_set.h).
 //
 // | From         | To           | What                                                             |
@@ -18,7 +18,7 @@
 #include "files/file_reader.h"
 #include "foundation/bytes.h"
 #include "src/PWHashedFile/blob_set.h"
-#include "src/PWHashedFile/udif_header.h"
+#include "formats/udif_header.h"
 #include "src/ticket_fault.h"
 
 namespace pinwell {

@@ -1,4 +1,4 @@
-#include "src/PWHashedFile/udif_header.h"
+#include "formats/udif_header.h"
 
 #include <algorithm>
 
@@ -12,6 +12,7 @@ using foundation::ByteReader;
 namespace {
 
 constexpr std::size_t kUDIFVersionOffset = 4;
+constexpr std::size_t kUDIFHeaderSizeOffset = 8;
 constexpr std::size_t kCodeSignLengthOffset = 304;
 
 ByteReader readerAt(foundation::ByteView header, std::size_t offset) {
@@ -38,6 +39,10 @@ std::uint32_t UDIFFileHeader::magicAsShown() const {
 
 std::uint32_t UDIFFileHeader::version() const {
     return readerAt(bytes_, kUDIFVersionOffset).be32("fUDIFVersion");
+}
+
+std::uint32_t UDIFFileHeader::headerSize() const {
+    return readerAt(bytes_, kUDIFHeaderSizeOffset).be32("fUDIFHeaderSize");
 }
 
 std::uint64_t UDIFFileHeader::codeSignOffset() const {

@@ -1,4 +1,4 @@
-#include "src/PWHashedFile/udif_header.h"
+#include "formats/udif_header.h"
 
 #include <gtest/gtest.h>
 

@@ -22,7 +22,7 @@
 // | 492    | 8    | fUDIFSectorCount, unaligned                                                    |
 // | 500    | 12   | fPadding                                                                       |
 //
-// Only the first two and the two code-signature fields are interpreted; all others are kept as stored.
+// Only the first three and the two code-signature fields are read; all others are kept as stored.
 #pragma once
 
 #include <array>
@@ -50,6 +50,7 @@ class UDIFFileHeader {
     std::uint32_t magicAsShown() const;
 
     std::uint32_t version() const;
+    std::uint32_t headerSize() const;  // as stored
     std::uint64_t codeSignOffset() const;
     std::uint64_t codeSignLength() const;
 
