@@ -22,7 +22,7 @@ std::optional<std::uint32_t> magicOf(std::uint32_t slot) {
     if (slot == codesign::kSlotCodeDirectory || codesign::isAlternateSlot(slot))
         return codesign::kCodeDirectoryMagic;
     if (slot == codesign::kSlotRequirements) return kRequirementsMagic;
-    if (slot == codesign::kSlotCms) return codesign::kWrapperMagic;
+    if (slot == codesign::kSlotCms) return kWrapperMagic;
     if (slot == kTicketSlotType) return kTicketBlobMagic;
     return std::nullopt;
 }
@@ -47,8 +47,7 @@ struct Range {
 };
 
 std::vector<Range> gapsBetween(const std::vector<codesign::Blob>& blobs, ByteView superblob) {
-    constexpr std::size_t kIndexEntrySize = 8;
-    std::vector<Range> used{{0, codesign::kSuperBlobHeaderSize + kIndexEntrySize * blobs.size()}};
+    std::vector<Range> used{{0, kSuperblobHeaderSize + kBlobIndexEntrySize * blobs.size()}};
     for (const codesign::Blob& blob : blobs) {
         const auto begin = static_cast<std::size_t>(blob.bytes.data() - superblob.data());
         used.push_back({begin, begin + blob.bytes.size()});

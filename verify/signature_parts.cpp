@@ -86,8 +86,8 @@ std::optional<SignatureParts> SignatureParts::fromSuperBlob(codesign::SharedByte
     std::map<std::uint32_t, codesign::SharedBytes> directories;
     for (const codesign::Blob& blob : codesign::parseSuperBlob(superblob)) {
         if (blob.slot == codesign::kSlotCms) {
-            if (blob.magic != codesign::kWrapperMagic) refuse("the CMS blob has a wrong magic");
-            parts.cms_ = blob.bytes.subspan(codesign::kBlobHeaderSize);
+            if (blob.magic != kWrapperMagic) refuse("the CMS blob has a wrong magic");
+            parts.cms_ = blob.bytes.subspan(kBlobHeaderSize);
         } else if (isDirectorySlot(blob.slot)) {
             directories.emplace(blob.slot, superblob.share(blob.bytes));
         } else if (blob.slot < kEndOfComponentSlots && blob.slot != codesign::kSlotTrailer &&

@@ -12,18 +12,14 @@ using foundation::ByteReader;
 
 namespace {
 
-constexpr std::size_t kIndexEntrySize = 8;
-
 struct Range {
     std::uint64_t begin;
     std::uint64_t end;
 };
 
-std::uint32_t readMagicAndLength(ByteReader& reader) {
-    if (reader.be32("superblob magic") != kSuperBlobMagic) refuse("not a superblob");
-    const std::uint32_t length = reader.be32("superblob length");
-    if (length < kSuperBlobHeaderSize) refuse("the superblob is shorter than its header");
-    return length;
+void requireSuperblob(const SuperblobHeader& header) {
+    if (header.magic != kSuperblobMagic) refuse("not a superblob");
+    if (header.length < kSuperblobHeaderSize) refuse("the superblob is shorter than its header");
 }
 
 void requireDistinctSlots(const std::vector<Blob>& blobs) {
@@ -41,14 +37,15 @@ void requireSeparate(std::vector<Range> ranges) {
     if (overlap != ranges.end()) refuse("blobs overlap");
 }
 
-SurveyedBlob surveyBlob(ByteView superblob, std::uint32_t slot, std::uint32_t offset) {
-    SurveyedBlob blob{.slot = slot, .offset = offset, .magic = {}, .length = {}, .bytes = {}};
-    if (offset >= superblob.size()) return blob;
-    blob.bytes = superblob.subspan(offset);
+SurveyedBlob surveyBlob(ByteView superblob, const BlobIndexEntry& entry) {
+    SurveyedBlob blob{.slot = entry.slot, .offset = entry.offset, .magic = {}, .length = {}, .bytes = {}};
+    if (entry.offset >= superblob.size()) return blob;
+    blob.bytes = superblob.subspan(entry.offset);
     if (blob.bytes.size() < kBlobHeaderSize) return blob;
-    ByteReader header(blob.bytes);
-    blob.magic = header.be32("blob magic");
-    blob.length = header.be32("blob length");
+    ByteReader reader(blob.bytes);
+    const BlobHeader header = readBlobHeader(reader);
+    blob.magic = header.magic;
+    blob.length = header.length;
     blob.bytes = blob.bytes.first(std::min<std::size_t>(*blob.length, blob.bytes.size()));
     return blob;
 }
@@ -60,13 +57,9 @@ std::uint32_t survey(ByteView superblob, Visit visit) {
     std::uint32_t count = 0;
     try {
         ByteReader index(superblob);
-        index.skip(8, "superblob magic and length");
-        count = index.be32("superblob count");
-        for (std::uint32_t i = 0; i < count; ++i) {
-            const std::uint32_t slot = index.be32("index slot");
-            const std::uint32_t offset = index.be32("index offset");
-            if (!visit(surveyBlob(superblob, slot, offset))) break;
-        }
+        count = readSuperblobHeader(index).count;
+        for (std::uint32_t i = 0; i < count; ++i)
+            if (!visit(surveyBlob(superblob, readBlobIndexEntry(index)))) break;
     } catch (const foundation::ShortRead&) {
         // A truncated entry is ignored.
     }
@@ -85,30 +78,29 @@ bool isSlotOfSignature(std::uint32_t slot) {
 }
 
 std::vector<Blob> parseSuperBlob(ByteView superblob) {
-    ByteReader header(superblob);
-    const std::uint32_t length = readMagicAndLength(header);
-    const ByteReader whole = ByteReader(superblob).sub(0, length, "superblob");
+    ByteReader start(superblob);
+    const SuperblobHeader header = readSuperblobHeader(start);
+    requireSuperblob(header);
+    const ByteReader whole = ByteReader(superblob).sub(0, header.length, "superblob");
 
     ByteReader index = whole;
-    index.seek(8, "superblob count");
-    const std::uint32_t count = index.be32("superblob count");
+    index.skip(kSuperblobHeaderSize, "superblob header");
+    const std::uint64_t indexSize = std::uint64_t{kBlobIndexEntrySize} * header.count;
     // Checked before the count sizes anything.
-    static_cast<void>(index.sub(index.position(), std::uint64_t{kIndexEntrySize} * count, "superblob index"));
+    static_cast<void>(index.sub(index.position(), indexSize, "superblob index"));
 
     std::vector<Blob> blobs;
-    std::vector<Range> ranges = {{0, kSuperBlobHeaderSize + std::uint64_t{kIndexEntrySize} * count}};
-    blobs.reserve(count);
-    ranges.reserve(count + std::size_t{1});
-    for (std::uint32_t i = 0; i < count; ++i) {
-        const std::uint32_t slot = index.be32("index slot");
-        const std::uint32_t offset = index.be32("index offset");
-        ByteReader blob = whole.sub(offset, kBlobHeaderSize, "blob header");
-        const std::uint32_t magic = blob.be32("blob magic");
-        const std::uint32_t blobLength = blob.be32("blob length");
-        if (blobLength < kBlobHeaderSize) refuse("a blob is shorter than its header");
-        ByteReader content = whole.sub(offset, blobLength, "blob");
-        blobs.push_back({slot, magic, content.bytes(blobLength, "blob")});
-        ranges.push_back({offset, std::uint64_t{offset} + blobLength});
+    std::vector<Range> ranges = {{0, kSuperblobHeaderSize + indexSize}};
+    blobs.reserve(header.count);
+    ranges.reserve(header.count + std::size_t{1});
+    for (std::uint32_t i = 0; i < header.count; ++i) {
+        const BlobIndexEntry entry = readBlobIndexEntry(index);
+        ByteReader blobStart = whole.sub(entry.offset, kBlobHeaderSize, "blob header");
+        const BlobHeader blob = readBlobHeader(blobStart);
+        if (blob.length < kBlobHeaderSize) refuse("a blob is shorter than its header");
+        ByteReader content = whole.sub(entry.offset, blob.length, "blob");
+        blobs.push_back({entry.slot, blob.magic, content.bytes(blob.length, "blob")});
+        ranges.push_back({entry.offset, std::uint64_t{entry.offset} + blob.length});
     }
     requireDistinctSlots(blobs);
     requireSeparate(std::move(ranges));
@@ -134,7 +126,7 @@ std::optional<SurveyedBlob> surveyLastBlobOf(std::uint32_t slot, ByteView superb
 }
 
 Data buildSuperBlob(const std::vector<std::pair<std::uint32_t, Data>>& blobs) {
-    const std::size_t first = kSuperBlobHeaderSize + 8 * blobs.size();
+    const std::size_t first = kSuperblobHeaderSize + kBlobIndexEntrySize * blobs.size();
     foundation::ByteWriter index;
     foundation::ByteWriter content;
     for (const auto& [slot, bytes] : blobs) {
@@ -142,18 +134,19 @@ Data buildSuperBlob(const std::vector<std::pair<std::uint32_t, Data>>& blobs) {
         content.bytes(bytes);
     }
     foundation::ByteWriter writer;
-    writer.be32(kSuperBlobMagic).be32(static_cast<std::uint32_t>(first + content.size()));
+    writer.be32(kSuperblobMagic).be32(static_cast<std::uint32_t>(first + content.size()));
     writer.be32(static_cast<std::uint32_t>(blobs.size())).bytes(index.data()).bytes(content.data());
     return std::move(writer).take();
 }
 
 SharedBytes readSuperBlob(const ByteSource& source, std::uint64_t offset, std::uint64_t areaLength) {
-    if (areaLength < kSuperBlobHeaderSize) refuse("the signature area is too short for a superblob");
-    const Data start = source.read(offset, kSuperBlobHeaderSize);
-    ByteReader header(start);
-    const std::uint32_t length = readMagicAndLength(header);
-    if (length > areaLength) refuse("the superblob is longer than its area");
-    return source.readShared(offset, length);
+    if (areaLength < kSuperblobHeaderSize) refuse("the signature area is too short for a superblob");
+    const Data start = source.read(offset, kSuperblobHeaderSize);
+    ByteReader reader(start);
+    const SuperblobHeader header = readSuperblobHeader(reader);
+    requireSuperblob(header);
+    if (header.length > areaLength) refuse("the superblob is longer than its area");
+    return source.readShared(offset, header.length);
 }
 
 }  // namespace pinwell::codesign

@@ -1,13 +1,4 @@
-// The superblob: the container of an embedded signature. All integers are big-endian; offsets count from its
-// start.
-//
-// | Offset     | Size      | Field                                                        |
-// |------------|-----------|--------------------------------------------------------------|
-// | 0          | 4         | magic FADE0CC0                                               |
-// | 4          | 4         | length of the whole, with this header                        |
-// | 8          | 4         | count of index entries                                       |
-// | 12         | 8 x count | index: slot (4), offset of the blob (4)                      |
-// | after it   |           | blobs: magic (4), length with these 8 bytes (4), payload     |
+// The superblob: the container of an embedded signature. formats/superblob_layout.h has its layout.
 //
 // The index may name the blobs in any order, and there may be gaps between them. The rest of the reserved
 // area after the superblob's own length is padding and is never read.
@@ -25,16 +16,9 @@
 
 #include "codesign/byte_source.h"
 #include "codesign/code_signing.h"
+#include "formats/superblob_layout.h"
 
 namespace pinwell::codesign {
-
-inline constexpr std::uint32_t kSuperBlobMagic = 0xFADE0CC0;
-
-/// The blob around bytes that are not a blob themselves, such as the CMS message.
-inline constexpr std::uint32_t kWrapperMagic = 0xFADE0B01;
-
-inline constexpr std::size_t kSuperBlobHeaderSize = 12;
-inline constexpr std::size_t kBlobHeaderSize = 8;
 
 /// Slots of the index.
 inline constexpr std::uint32_t kSlotCodeDirectory = 0;

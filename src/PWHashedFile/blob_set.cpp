@@ -21,53 +21,43 @@ using foundation::SparseBuffer;
 
 namespace {
 
-struct IndexEntry {
-    std::uint32_t slotType;
-    std::uint32_t offset;
-
-    auto operator<=>(const IndexEntry&) const = default;
-};
-
 // In index order; stops early if the superblob ends.
-std::vector<IndexEntry> readIndex(ByteView superblob, std::uint32_t count) {
-    std::vector<IndexEntry> entries;
+std::vector<BlobIndexEntry> readIndex(ByteView superblob, std::uint32_t count) {
+    std::vector<BlobIndexEntry> entries;
     try {
         ByteReader reader(superblob);
         reader.skip(kSuperblobHeaderSize, "superblob header");
         entries.reserve(std::min<std::size_t>(count, reader.remaining() / kBlobIndexEntrySize));
-        for (std::uint32_t i = 0; i < count; ++i) {
-            const std::uint32_t slotType = reader.be32("slot type");
-            entries.push_back({slotType, reader.be32("blob offset")});
-        }
+        for (std::uint32_t i = 0; i < count; ++i) entries.push_back(readBlobIndexEntry(reader));
     } catch (const ShortRead&) {
         // The caller detects missing entries.
     }
     return entries;
 }
 
-bool hasEqualEntries(const std::vector<IndexEntry>& index) {
-    const auto leadsOn = [](const IndexEntry& a, const IndexEntry& b) { return a.offset < b.offset; };
-    const auto goesBack = [&](const IndexEntry& a, const IndexEntry& b) { return !leadsOn(a, b); };
+bool hasEqualEntries(const std::vector<BlobIndexEntry>& index) {
+    const auto leadsOn = [](const BlobIndexEntry& a, const BlobIndexEntry& b) { return a.offset < b.offset; };
+    const auto goesBack = [&](const BlobIndexEntry& a, const BlobIndexEntry& b) { return !leadsOn(a, b); };
     if (std::adjacent_find(index.begin(), index.end(), goesBack) == index.end()) return false;
-    std::vector<IndexEntry> sorted = index;
+    std::vector<BlobIndexEntry> sorted = index;
     std::sort(sorted.begin(), sorted.end());
     return std::adjacent_find(sorted.begin(), sorted.end()) != sorted.end();
 }
 
 // The blob from entry.offset to `end`; `nullopt` if its own header disagrees. Throws ShortRead if it is not
 // within the superblob.
-std::optional<BlobRecord> readBlob(ByteView superblob, const IndexEntry& entry, std::uint64_t end) {
+std::optional<BlobRecord> readBlob(ByteView superblob, const BlobIndexEntry& entry, std::uint64_t end) {
     ByteReader reader(superblob);
     reader.seek(entry.offset, "blob");
-    const std::uint32_t magic = reader.be32("blob magic");
-    const std::uint64_t storedLength = reader.be32("blob length");
+    const BlobHeader header = readBlobHeader(reader);
+    const std::uint64_t storedLength = header.length;
     const std::uint64_t length = end - entry.offset;  // wraps if the index is out of order
     if (length != storedLength) {
         NoisyLog("Calculated length (%tu) does not match embedded blob length (%tu)", length, storedLength);
         return std::nullopt;
     }
     const ByteView data = ByteReader(superblob).sub(entry.offset, length, "blob").bytes(length, "blob");
-    return BlobRecord{entry.slotType, entry.offset, magic, data};
+    return BlobRecord{entry.slot, entry.offset, header.magic, data};
 }
 
 /// The bytes that a ticket adds to the index and to the blobs, besides its own.
@@ -126,7 +116,7 @@ std::string_view slotName(std::uint32_t slot) {
 }
 
 std::optional<BlobSet> orderedBlobSetForSuperBlob(ByteView superblob, std::uint32_t numberOfBlobs) {
-    const std::vector<IndexEntry> index = readIndex(superblob, numberOfBlobs);
+    const std::vector<BlobIndexEntry> index = readIndex(superblob, numberOfBlobs);
     if (index.size() < numberOfBlobs || hasEqualEntries(index)) {
         NoisyLog("Did not find %d unique blobs in the code signing data.", numberOfBlobs);
         return std::nullopt;

@@ -1,13 +1,5 @@
-// The code-signature superblob of a disk image, split into its blobs and rebuilt. All integers are
-// big-endian; offsets count from the superblob's start.
-//
-// | Offset         | Size      | Field                                                              |
-// |----------------|-----------|--------------------------------------------------------------------|
-// | 0              | 4         | magic FADE0CC0                                                     |
-// | 4              | 4         | length of the whole, with this header                              |
-// | 8              | 4         | count of index entries                                             |
-// | 12             | 8 x count | index: slot type (4), offset of the blob (4)                       |
-// | 12 + 8 x count | rest      | blobs: magic (4), length with these 8 bytes (4), payload           |
+// The code-signature superblob of a disk image (formats/superblob_layout.h), split into its blobs and
+// rebuilt.
 //
 // Stricter than the code-signing service, because the parts are written back: the blobs directly follow the
 // index, in index order, without gaps, and the last one ends with the superblob. Two equal index entries are
@@ -20,20 +12,16 @@
 #include <string_view>
 #include <vector>
 
+#include "formats/superblob_layout.h"
 #include "foundation/bytes.h"
 #include "foundation/sparse_bytes.h"
 #include "foundation/value.h"
 
 namespace pinwell {
 
-inline constexpr std::uint32_t kSuperblobMagic = 0xFADE0CC0;
-inline constexpr std::uint32_t kSuperblobHeaderSize = 12;
-inline constexpr std::uint32_t kBlobIndexEntrySize = 8;
-inline constexpr std::uint32_t kBlobHeaderSize = 8;
-
 /// The slot of a stapled ticket, and the magic of its blob.
 inline constexpr std::uint32_t kTicketSlotType = 0x10002;
-inline constexpr std::uint32_t kTicketBlobMagic = 0xFADE0B01;
+inline constexpr std::uint32_t kTicketBlobMagic = kWrapperMagic;
 
 /// The contents of a slot in words; "unknown" for an unknown slot.
 std::string_view slotName(std::uint32_t slot);

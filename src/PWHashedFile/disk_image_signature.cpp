@@ -102,12 +102,13 @@ bool readDiskImageBlobs(const std::string& name, disk_image_signature& into) {
     const ByteView start = into.superblob.view().first(std::min(into.superblob.size(), header.size()));
     std::copy(start.begin(), start.end(), header.begin());
     ByteReader reader(header);
-    if (reader.be32("superblob magic") != kSuperblobMagic) {
+    const SuperblobHeader stored = readSuperblobHeader(reader);
+    if (stored.magic != kSuperblobMagic) {
         NoisyLog("Not a supported code signature block, %d", ByteReader(header).le32("superblob magic"));
         return into.refuse(into.csStart, "the superblob does not begin with its magic");
     }
-    const std::uint32_t length = reader.be32("superblob length");
-    into.numBlobs = reader.be32("superblob count");
+    const std::uint32_t length = stored.length;
+    into.numBlobs = stored.count;
     NoisyLog("Stored Codesign length: %u number of blobs: %d", length, into.numBlobs);
 
     const std::uint64_t mostBlobs = into.csLength / kMinimumBlobFootprint;
