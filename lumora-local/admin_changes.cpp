@@ -33,6 +33,8 @@ auto changing(Work&& work) {
                       format("the record %@ is revoked; \"reinstate\" with a \"comment\" makes its software "
                              "valid again",
                              failure.revoked()));
+    } catch (const TooManyHashesFailure& failure) {
+        throw Refused(422, failure.what());
     } catch (const ReusedKeyFailure&) {
         throw Refused(422, "the Idempotency-Key belongs to another request");
     }

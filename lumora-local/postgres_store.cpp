@@ -101,6 +101,19 @@ std::optional<RevokedElsewhere> revokedBeside(PostgresConnection& connection, En
     return RevokedElsewhere{parseEnvironment(rows.text(0, 0)).value_or(environment), rows.text(0, 1)};
 }
 
+std::vector<CodeHash> hashesOf(PostgresConnection& connection, Environment environment,
+                               const std::string& name, Deadline deadline) {
+    const PostgresRows rows = connection.query(
+        "SELECT algorithm, hash FROM hash WHERE environment = $1 AND name = $2 ORDER BY position",
+        {nameOf(environment), name}, deadline);
+    std::vector<CodeHash> hashes;
+    for (std::size_t row = 0; row < rows.size(); ++row) {
+        hashes.push_back(
+            {static_cast<std::uint32_t>(rows.integer(row, 0)), foundation::toData(rows.bytes(row, 1))});
+    }
+    return hashes;
+}
+
 /// From the columns `asset, length(ticket), ticket`, starting at `column`; the last may be NULL for an asset.
 Delivery readDelivery(const PostgresRows& rows, std::size_t row, int column) {
     Delivery delivery;
@@ -375,14 +388,16 @@ PutOutcome PostgresStore::put(Environment environment, const std::vector<SignedR
             if (!entry.record.revoked)
                 standing.elsewhere = revokedBeside(connection, environment, entry.record, deadline);
             const Action action = actionOf(environment, entry.record, standing, occasion);
+            SignedRecord kept = entry;
             if (before) {
+                keepEarlierHashes(kept.record, hashesOf(connection, environment, kept.record.name, deadline));
                 connection.query("DELETE FROM record WHERE environment = $1 AND name = $2",
                                  {nameOf(environment), entry.record.name}, deadline);
             } else {
                 ++added;
             }
             const Event event = makeEvent(environment, entry, action, occasion, std::move(head.hash));
-            batch.add(environment, entry);
+            batch.add(environment, kept);
             batch.add(event, ++head.position);
             batch.write(connection, deadline);
             head.hash = event.hash;

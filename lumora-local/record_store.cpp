@@ -1,5 +1,8 @@
 #include "lumora-local/record_store.h"
 
+#include <algorithm>
+#include <set>
+
 #include "foundation/format.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/sha256.h"
@@ -35,6 +38,20 @@ Action actionOf(Environment environment, const Record& record, const Standing& b
     if (occasion.reinstates) return Action::reinstated;
     if (revoked) refuse(record);
     refuse(environment, record, *before.elsewhere);
+}
+
+void keepEarlierHashes(Record& record, const std::vector<CodeHash>& earlier) {
+    const std::set<CodeHash> listed(record.hashes.begin(), record.hashes.end());
+    const std::size_t most = std::max(listed.size(), kMaximumKeptHashes);
+    for (const CodeHash& hash : earlier) {
+        if (listed.contains(hash)) continue;
+        if (record.hashes.size() >= most) {
+            throw TooManyHashesFailure(
+                foundation::format("the tickets of the record %@ would list more than %zu hashes together",
+                                   record.name, kMaximumKeptHashes));
+        }
+        record.hashes.push_back(hash);
+    }
 }
 
 Event makeEvent(Environment environment, const SignedRecord& entry, Action action, const Occasion& occasion,

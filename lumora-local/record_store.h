@@ -69,7 +69,7 @@ struct StoreFacts {
 struct Record {
     std::string name;
     std::string label;             // for people: the artefact's file name
-    std::vector<CodeHash> hashes;  // the ticket's hashes, the artefact's own first
+    std::vector<CodeHash> hashes;  // the ticket's, the artefact's own first; then those of earlier tickets
     bool revoked = false;
     bool asAsset = false;
     foundation::Date signedAt;
@@ -116,6 +116,15 @@ class RevokedFailure : public Failure {
 
   private:
     std::string revoked_;
+};
+
+/// The highest number of hashes that a record keeps from its earlier tickets and the present one.
+inline constexpr std::size_t kMaximumKeptHashes = 65'536;
+
+/// A put that would give a record too many hashes.
+class TooManyHashesFailure : public Failure {
+  public:
+    explicit TooManyHashesFailure(const std::string& text) : Failure(EX_DATAERR, text) {}
 };
 
 /// A request under the key of another one.
@@ -232,6 +241,10 @@ class RecordStore : public RecordSource {
     /// every environment, and one in development only there. When this returns, the change survives a
     /// crash.
     ///
+    /// A record keeps the hashes of its earlier tickets. So a later revocation covers all of them, even if
+    /// the last ticket lists fewer. Throws TooManyHashesFailure beyond kMaximumKeptHashes, unless one ticket
+    /// alone lists more.
+    ///
     /// If the occasion's request was carried out before, nothing changes, and the outcome is that of
     /// the first time. Throws ReusedKeyFailure if its key belongs to another request. Needs one record.
     virtual PutOutcome put(Environment environment, const std::vector<SignedRecord>& records,
@@ -287,6 +300,9 @@ struct Standing {
 /// occasion does not reinstate.
 Action actionOf(Environment environment, const Record& record, const Standing& before,
                 const Occasion& occasion);
+
+/// Adds the hashes of a record's earlier tickets, behind its own. Throws TooManyHashesFailure as put() does.
+void keepEarlierHashes(Record& record, const std::vector<CodeHash>& earlier);
 
 /// The event for a put, with its hash.
 Event makeEvent(Environment environment, const SignedRecord& entry, Action action, const Occasion& occasion,

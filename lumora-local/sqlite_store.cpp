@@ -125,6 +125,16 @@ void insertRecord(SQLite::Database& database, Environment environment, const Sig
     statement.exec();
 }
 
+std::vector<CodeHash> hashesOf(SQLite::Database& database, Environment environment, const std::string& name) {
+    std::vector<CodeHash> hashes;
+    SQLite::Statement row(
+        database, "SELECT algorithm, hash FROM hash WHERE environment = ? AND name = ? ORDER BY position");
+    row.bind(1, environmentText(environment));
+    row.bind(2, name);
+    while (row.executeStep()) hashes.push_back({row.getColumn(0).getUInt(), toData(row.getColumn(1))});
+    return hashes;
+}
+
 void insertHashes(SQLite::Database& database, Environment environment, const Record& record) {
     SQLite::Statement statement(
         database, "INSERT INTO hash (environment, name, position, algorithm, hash) VALUES (?, ?, ?, ?, ?)");
@@ -156,13 +166,7 @@ Record readRecord(SQLite::Database& database, Environment environment, SQLite::S
     record.signedAt = Date{row.getColumn(3).getInt64()};
     record.asAsset = row.getColumn(4).getInt() != 0;
 
-    SQLite::Statement hashes(
-        database, "SELECT algorithm, hash FROM hash WHERE environment = ? AND name = ? ORDER BY position");
-    hashes.bind(1, environmentText(environment));
-    hashes.bind(2, record.name);
-    while (hashes.executeStep()) {
-        record.hashes.push_back({hashes.getColumn(0).getUInt(), toData(hashes.getColumn(1))});
-    }
+    record.hashes = hashesOf(database, environment, record.name);
     return record;
 }
 
@@ -269,9 +273,11 @@ PutOutcome SqliteStore::put(Environment environment, const std::vector<SignedRec
         for (const SignedRecord& entry : records) {
             const Action action = actionOf(environment, entry.record,
                                            standingOf(*database_, environment, entry.record), occasion);
-            deleteRecord(*database_, environment, entry.record.name);
+            Record record = entry.record;
+            keepEarlierHashes(record, hashesOf(*database_, environment, record.name));
+            deleteRecord(*database_, environment, record.name);
             insertRecord(*database_, environment, entry);
-            insertHashes(*database_, environment, entry.record);
+            insertHashes(*database_, environment, record);
             const Event event = makeEvent(environment, entry, action, occasion, std::move(previous));
             insertEvent(*database_, event);
             previous = event.hash;

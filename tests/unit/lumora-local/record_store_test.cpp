@@ -275,6 +275,49 @@ TEST_P(RecordStoreTest, ReinstatesARevokedHashUnderAnotherNameIfTold) {
     EXPECT_NO_THROW(store.put(kProduction, {listing("2/3/a", {1})}, kReinstating));
 }
 
+TEST_P(RecordStoreTest, RevokesTheHashesOfEarlierTicketsToo) {
+    RecordStore& store = openAndKeep();
+    store.put(kProduction, {listing("2/2/a", {1, 2})}, kOccasion);
+    store.put(kProduction, {listing("2/2/a", {1})}, kOccasion);
+    std::optional<Record> record = store.find(kProduction, "2/2/a");
+    ASSERT_TRUE(record);
+    EXPECT_EQ(record->hashes, listing("2/2/a", {1, 2}).record.hashes);
+    SignedRecord revoked{*record, foundation::toData("ticket")};
+    revoked.record.revoked = true;
+    store.put(kProduction, {revoked}, kOccasion);
+    EXPECT_THROW(store.put(kProduction, {listing("2/2/b", {2})}, kOccasion), RevokedFailure);
+
+    // A ticket that is issued between the reading of a record and its revocation.
+    store.put(kProduction, {listing("2/2/c", {3})}, kOccasion);
+    SignedRecord late = listing("2/2/c", {3});
+    late.record.revoked = true;
+    store.put(kProduction, {listing("2/2/c", {3, 4})}, kOccasion);
+    store.put(kProduction, {late}, kOccasion);
+    EXPECT_THROW(store.put(kProduction, {listing("2/2/d", {4})}, kOccasion), RevokedFailure);
+}
+
+TEST(EarlierHashes, AreBounded) {
+    const auto hashes = [](std::size_t from, std::size_t count) {
+        std::vector<CodeHash> all;
+        for (std::size_t i = from; i < from + count; ++i) {
+            CodeHash hash{2, Data(20)};
+            for (std::size_t byte = 0; byte < 4; ++byte)
+                hash.hash[byte] = static_cast<std::byte>(i >> (8 * byte));
+            all.push_back(std::move(hash));
+        }
+        return all;
+    };
+    Record record;
+    record.hashes = hashes(0, 8);
+    keepEarlierHashes(record, hashes(4, kMaximumKeptHashes - 4));
+    EXPECT_EQ(record.hashes, hashes(0, kMaximumKeptHashes));
+    EXPECT_THROW(keepEarlierHashes(record, hashes(kMaximumKeptHashes, 1)), TooManyHashesFailure);
+    // A ticket alone is not refused for its size.
+    Record large;
+    large.hashes = hashes(0, kMaximumKeptHashes + 5);
+    EXPECT_NO_THROW(keepEarlierHashes(large, hashes(0, 3)));
+}
+
 TEST_P(RecordStoreTest, LogsThatATicketReinstatesAHashThatAnotherRecordHasRevoked) {
     RecordStore& store = openAndKeep();
     SignedRecord revoked = listing("2/2/a", {1});
