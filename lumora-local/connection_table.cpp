@@ -17,7 +17,8 @@ ConnectionTable::Identifier ConnectionTable::enter(const std::string& address, s
                 return std::find_if(peer.begin(), peer.end(),
                                     [&](const Entry& e) { return e.state == state; });
             };
-            auto oldest = first(State::silent);
+            auto oldest = first(State::handshaking);
+            if (oldest == peer.end()) oldest = first(State::silent);
             if (oldest == peer.end()) oldest = first(State::waiting);
             if (oldest == peer.end()) return 0;
             evicted = std::move(oldest->close);
@@ -25,7 +26,7 @@ ConnectionTable::Identifier ConnectionTable::enter(const std::string& address, s
             peer.erase(oldest);
         }
         identifier = ++last_;
-        peer.push_back({identifier, State::silent, std::move(close)});
+        peer.push_back({.identifier = identifier, .close = std::move(close)});
         places_.emplace(identifier, Place{address, std::prev(peer.end())});
     }
     if (evicted) evicted();
@@ -63,13 +64,28 @@ void ConnectionTable::leave(Identifier connection) {
     places_.erase(place);
 }
 
+std::size_t ConnectionTable::closeHandshakesBefore(std::chrono::steady_clock::time_point time) {
+    std::vector<std::function<void()>> closing;
+    {
+        const std::lock_guard lock(mutex_);
+        for (auto& [address, peer] : peers_) {
+            for (Entry& entry : peer) {
+                if (entry.state == State::handshaking && entry.entered < time && entry.close)
+                    closing.push_back(std::exchange(entry.close, nullptr));
+            }
+        }
+    }
+    for (const auto& close : closing) close();
+    return closing.size();
+}
+
 void ConnectionTable::closeSilent() {
     std::vector<std::function<void()>> closing;
     {
         const std::lock_guard lock(mutex_);
         for (auto& [address, peer] : peers_) {
             for (Entry& entry : peer) {
-                if (entry.state == State::silent && entry.close)
+                if (entry.state <= State::silent && entry.close)
                     closing.push_back(std::exchange(entry.close, nullptr));
             }
         }

@@ -1,11 +1,12 @@
 // The open connections, and the one to close if a peer has too many.
 //
 // A connection is silent while it has no request: before and during the handshake, and between requests. It
-// waits while only a part of a request has arrived. If a peer exceeds the bound, it loses its oldest silent
-// connection, or else the one that has waited longest. So nobody at an address can keep others out by silent
-// connections or partial requests.
+// waits while only a part of a request has arrived. If a peer exceeds the bound, it loses one connection: the
+// oldest one without a complete handshake, else the oldest silent one, else the one that has waited longest.
+// So nobody at an address can keep others out by silent connections or partial requests.
 #pragma once
 
+#include <chrono>
 #include <cstdint>
 #include <functional>
 #include <list>
@@ -24,8 +25,8 @@ class ConnectionTable {
 
     /// Enters a silent connection of the peer at `address`. `close` ends the connection soon, unless it has
     /// become busy. It is called without a lock held, from any thread, at most once, and never after leave()
-    /// has returned. If the peer has too many connections, its oldest silent one is closed, or else the one
-    /// that has waited longest. If all are busy, returns 0 and enters nothing.
+    /// has returned. If the peer has too many connections, one of them is closed. If all are busy, returns 0
+    /// and enters nothing.
     Identifier enter(const std::string& address, std::function<void()> close);
 
     /// The first bytes of a request are here.
@@ -39,17 +40,22 @@ class ConnectionTable {
 
     void leave(Identifier connection);
 
+    /// Closes every connection that was entered before `time` and has no complete handshake yet. Returns
+    /// their number.
+    std::size_t closeHandshakesBefore(std::chrono::steady_clock::time_point time);
+
     /// Closes every silent connection.
     void closeSilent();
 
     std::size_t count() const;
 
   private:
-    enum class State { silent, waiting, busy };
+    enum class State { handshaking, silent, waiting, busy };
     struct Entry {
         Identifier identifier = 0;
-        State state = State::silent;
+        State state = State::handshaking;
         std::function<void()> close;
+        std::chrono::steady_clock::time_point entered = std::chrono::steady_clock::now();
     };
     using Peer = std::list<Entry>;  // entries of one state are in the order in which they reached it
 

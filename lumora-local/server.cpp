@@ -26,6 +26,11 @@ using ErrorCode = boost::system::error_code;
 // After the system had no descriptor or no memory for a connection.
 constexpr std::chrono::milliseconds kPauseWhenShort{50};
 
+// While all places are taken and somebody waits for one: how long a handshake may take, and when to look
+// again.
+constexpr std::chrono::milliseconds kHandshakeTimeWhenFull{1'000};
+constexpr std::chrono::milliseconds kPauseWhenFull{100};
+
 /// Accepts connections while there are places for them. Its own handlers run on one strand.
 class Acceptor {
   public:
@@ -46,7 +51,7 @@ class Acceptor {
         if (!acceptor_.is_open()) return;
         if (free_ == 0) {
             waiting_ = true;
-            return;
+            return makeRoomForTheNext();
         }
         acceptor_.async_accept(asio::make_strand(context_), [this](ErrorCode error, Tcp::socket socket) {
             if (error == asio::error::operation_aborted) return;
@@ -69,6 +74,22 @@ class Acceptor {
     }
 
   private:
+    /// Strangers who complete no handshake must not take all places.
+    void makeRoomForTheNext() {
+        if (std::exchange(watching_, true)) return;
+        acceptor_.async_wait(Tcp::acceptor::wait_read, [this](ErrorCode error) {
+            watching_ = false;
+            if (error || !waiting_) return;
+            if (shared_.table.closeHandshakesBefore(std::chrono::steady_clock::now() -
+                                                    kHandshakeTimeWhenFull) > 0)
+                return;
+            pause_.expires_after(kPauseWhenFull);
+            pause_.async_wait([this](ErrorCode cancelled) {
+                if (!cancelled && waiting_) makeRoomForTheNext();
+            });
+        });
+    }
+
     std::shared_ptr<void> takePlace() {
         --free_;
         return {nullptr, [this](void*) {
@@ -92,7 +113,8 @@ class Acceptor {
     asio::steady_timer pause_;
     ConnectionContext& shared_;
     std::size_t free_;
-    bool waiting_ = false;
+    bool waiting_ = false;   // for a place
+    bool watching_ = false;  // for the next connection, while there is no place
 };
 
 /// Calls back whenever a descriptor is readable, until it is cancelled. The descriptor stays its owner's.

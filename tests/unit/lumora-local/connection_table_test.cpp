@@ -80,6 +80,24 @@ TEST_F(ConnectionTableTest, ForgetsConnectionsThatLeave) {
     EXPECT_EQ(table_.count(), 2U);
 }
 
+TEST_F(ConnectionTableTest, ClosesAConnectionWithoutAHandshakeBeforeASilentOne) {
+    table_.becomeSilent(enter("a", 1));
+    enter("a", 2);
+    enter("a", 3);
+    EXPECT_EQ(closed_, (std::vector<int>{2}));
+}
+
+TEST_F(ConnectionTableTest, ClosesTheHandshakesThatBeganBeforeATime) {
+    table_.becomeSilent(enter("a", 1));
+    enter("b", 2);
+    EXPECT_EQ(table_.closeHandshakesBefore(std::chrono::steady_clock::now() - std::chrono::hours(1)), 0U);
+    EXPECT_EQ(closed_, std::vector<int>{});
+    const auto later = std::chrono::steady_clock::now() + std::chrono::hours(1);
+    EXPECT_EQ(table_.closeHandshakesBefore(later), 1U);
+    EXPECT_EQ(table_.closeHandshakesBefore(later), 0U);
+    EXPECT_EQ(closed_, (std::vector<int>{2}));
+}
+
 TEST_F(ConnectionTableTest, ClosesTheSilentOnesOnceAtTheEnd) {
     table_.becomeBusy(enter("a", 1));
     table_.becomeWaiting(enter("c", 3));

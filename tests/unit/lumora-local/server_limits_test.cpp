@@ -196,6 +196,14 @@ TEST(SilentConnections, MakeRoomTheOldestFirst) {
     EXPECT_TRUE(silent.isOpen(1));
 }
 
+TEST(SilentConnections, MakeRoomForOtherPeersWhenAllPlacesAreTaken) {
+    LimitedServer server({.connections = 8, .handshakeTime = std::chrono::hours(1)});
+    SilentPeers silent;
+    for (int i = 0; i < 8; ++i) silent.connect(server.port());
+    for (int i = 0; i < 3; ++i) EXPECT_EQ(healthAt(server.port()), "HTTP/1.1 200");
+    EXPECT_TRUE(silent.isClosed(0));
+}
+
 TEST(SilentConnections, EndWhenTheHandshakeTakesTooLong) {
     LimitedServer server({.handshakeTime = kSoon});
     SilentPeers silent;
