@@ -30,10 +30,10 @@ std::shared_ptr<const TicketSigner> openSigner(const ServiceDirectory& directory
     return std::make_shared<const TicketSigner>(directory.openSigner());
 }
 
-AdminRoutes allRoutes(RecordStore& store, SignerInUse signer) {
+AdminRoutes allRoutes(RecordStore& store, RecordStore& reading, SignerInUse signer) {
     AdminRoutes routes = changingRoutes(store, std::move(signer));
-    for (AdminRoute& route : readingRoutes(store)) routes.push_back(std::move(route));
-    for (AdminRoute& route : pageRoutes(store)) routes.push_back(std::move(route));
+    for (AdminRoute& route : readingRoutes(reading)) routes.push_back(std::move(route));
+    for (AdminRoute& route : pageRoutes(reading)) routes.push_back(std::move(route));
     return routes;
 }
 
@@ -47,12 +47,13 @@ AdminListener::AdminListener(const ServiceDirectory& directory, AdminOptions opt
       signer_(openSigner(directory)),
       signerSettings_(directory.settings().signer),
       store_(openStore(directory)),
+      reading_(openStore(directory)),
       access_(directory.accessPath()),
       tls_(tlsFilesOf(directory, options_)),
       listener_(options_.listen),
       rates_(kRequestRate),
       refusals_(*store_, output_.err),
-      service_(allRoutes(*store_, [this] { return signer(); }), access_, rates_, refusals_) {}
+      service_(allRoutes(*store_, *reading_, [this] { return signer(); }), access_, rates_, refusals_) {}
 
 AdminListener::~AdminListener() {
     if (!thread_.joinable()) return;

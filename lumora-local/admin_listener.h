@@ -55,6 +55,7 @@ class AdminListener {
     std::shared_ptr<const TicketSigner> signer_;
     SignerSettings signerSettings_;
     std::unique_ptr<RecordStore> store_;
+    std::unique_ptr<RecordStore> reading_;  // of its own, so that no reader waits for a writer
     AccessList access_;
     TlsContext tls_;
     Listener listener_;
