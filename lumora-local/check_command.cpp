@@ -47,7 +47,7 @@ class Inspection {
   private:
     static bool exists(const std::string& path) {
         std::error_code ignored;
-        return std::filesystem::exists(path, ignored);
+        return std::filesystem::symlink_status(path, ignored).type() != std::filesystem::file_type::not_found;
     }
 
     void look(const std::string& subject, const std::function<void()>& check) {

@@ -9,8 +9,11 @@ namespace pinwell::foundation {
 
 namespace {
 
-/// Characters that control the direction of writing: marks, embeddings, overrides and isolates (UAX #9).
-constexpr std::array<std::pair<std::string_view, std::string_view>, 12> kDirections{{
+/// Separators of lines and paragraphs, and characters that control the direction of writing: marks,
+/// embeddings, overrides and isolates (UAX #9).
+constexpr std::array<std::pair<std::string_view, std::string_view>, 14> kMisleading{{
+    {"\xE2\x80\xA8", "\\u2028"},
+    {"\xE2\x80\xA9", "\\u2029"},
     {"\xD8\x9C", "\\u061c"},
     {"\xE2\x80\x8E", "\\u200e"},
     {"\xE2\x80\x8F", "\\u200f"},
@@ -34,7 +37,7 @@ void replaceAll(std::string& text, std::string_view part, std::string_view other
 
 std::string escapeForDisplay(std::string_view text) {
     std::string result = escapeForTerminal(text);
-    for (const auto& [mark, name] : kDirections) replaceAll(result, mark, name);
+    for (const auto& [mark, name] : kMisleading) replaceAll(result, mark, name);
     return result;
 }
 

@@ -10,6 +10,10 @@ TEST(TextForDisplay, ShowsCharactersThatChangeTheDirectionOfWriting) {
     EXPECT_EQ(escapeForDisplay("\u2066\u2069\u200f\u061c"), "\\u2066\\u2069\\u200f\\u061c");
 }
 
+TEST(TextForDisplay, ShowsSeparatorsOfLines) {
+    EXPECT_EQ(escapeForDisplay("a\u2028b\u2029"), "a\\u2028b\\u2029");
+}
+
 TEST(TextForDisplay, ShowsControlCharactersAndWhatIsNotUtf8) {
     EXPECT_EQ(escapeForDisplay("a\x1b[2J\n\xff"), "a\\x1b[2J\\n\\xff");
 }
