@@ -82,7 +82,7 @@ Answer revokeRecord(RecordStore& store, const TicketSigner& signer, const AdminR
 
 }  // namespace
 
-AdminRoutes changingRoutes(RecordStore& store, SignerInUse signer) {
+AdminRoutes changingRoutes(RecordStore& store, const SignerInUse& signer) {
     return {
         {"POST",
          "/v1/tickets",

@@ -30,8 +30,8 @@ std::shared_ptr<const TicketSigner> openSigner(const ServiceDirectory& directory
     return std::make_shared<const TicketSigner>(directory.openSigner());
 }
 
-AdminRoutes allRoutes(RecordStore& store, RecordStore& reading, SignerInUse signer) {
-    AdminRoutes routes = changingRoutes(store, std::move(signer));
+AdminRoutes allRoutes(RecordStore& store, RecordStore& reading, const SignerInUse& signer) {
+    AdminRoutes routes = changingRoutes(store, signer);
     for (AdminRoute& route : readingRoutes(reading)) routes.push_back(std::move(route));
     for (AdminRoute& route : pageRoutes(reading)) routes.push_back(std::move(route));
     return routes;

@@ -18,7 +18,7 @@ inline constexpr std::size_t kMaximumPage = 100;
 using SignerInUse = std::function<std::shared_ptr<const TicketSigner>()>;
 
 /// POST /v1/tickets, POST /v1/revocations. `store` must outlive the routes.
-AdminRoutes changingRoutes(RecordStore& store, SignerInUse signer);
+AdminRoutes changingRoutes(RecordStore& store, const SignerInUse& signer);
 
 /// GET /v1/records, GET /v1/events. `store` must outlive the routes.
 AdminRoutes readingRoutes(RecordStore& store);

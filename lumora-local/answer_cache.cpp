@@ -14,7 +14,7 @@ std::string cacheKey(Environment environment, std::string_view key) {
 
 std::size_t weightOf(const std::string& key, const KeptAnswer& answer) {
     std::size_t weight = key.size() + answer.text.size();
-    for (const std::string& name : answer.names) weight += sizeof name + name.size();
+    for (const std::string& name : answer.names) weight += sizeof(std::string) + name.size();
     return weight;
 }
 

@@ -84,9 +84,8 @@ void readPassphrase(const ServiceDirectory& directory, Passphrase& passphrase) {
 
 IssuerFiles ownIntermediate(const ServiceDirectory& directory) {
     const std::vector<std::string>& chain = directory.signerChainPaths();
-    const IssuerFiles files{chain.size() > 1 ? chain[1] : "",
-                            directory.servicePath("ticket-intermediate.key"),
-                            directory.settings().passphraseFile};
+    IssuerFiles files{chain.size() > 1 ? chain[1] : "", directory.servicePath("ticket-intermediate.key"),
+                      directory.settings().passphraseFile};
     std::error_code ignored;
     if (files.certificate.empty() || !std::filesystem::exists(files.key, ignored)) {
         throw Failure(EX_CONFIG,
@@ -176,7 +175,7 @@ RotationReport rotateSigner(const ServiceDirectory& directory, const SignerRotat
     if (!rotation.requestFile.empty()) return requestNextSigner(directory, rotation.requestFile, now);
     const IssuerFiles issuer = ownIntermediate(directory);
     const std::string name = freshName(directory, "ticket-signer", now);
-    const std::string oldKey = directory.signerKeyPath();
+    const std::string& oldKey = directory.signerKeyPath();
     NewFiles files(directory);
     std::string key = rotation.tokenKey;
     std::string certificate;
@@ -203,7 +202,7 @@ RotationReport rotateSigner(const ServiceDirectory& directory, const SignerRotat
 RotationReport rotateServer(const ServiceDirectory& directory, const std::string& rootDirectory, Date now) {
     const std::string rootKey =
         rootDirectory.empty() ? directory.servicePath("root.key") : rootDirectory + "/root.key";
-    const std::string oldKey = directory.serverKeyPath();
+    const std::string& oldKey = directory.serverKeyPath();
     std::error_code ignored;
     if (!std::filesystem::exists(rootKey, ignored)) {
         throw Failure(EX_CONFIG,
