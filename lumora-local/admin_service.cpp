@@ -109,7 +109,7 @@ Answer AdminService::answerBody(const RequestHead& head, std::string_view body) 
         return withCommonHeaders(route.handle(request));
     } catch (const Refused& refused) {
         note(head, refused.status(), refused.what(), body);
-        return withCommonHeaders(problem(refused.status(), refused.what()));
+        return withCommonHeaders(refusal(refused.status(), refused.what(), head));
     }
 }
 

@@ -64,14 +64,14 @@ void ConnectionTable::leave(Identifier connection) {
     places_.erase(place);
 }
 
-std::size_t ConnectionTable::closeHandshakesBefore(std::chrono::steady_clock::time_point time) {
+template <class Condition>
+std::size_t ConnectionTable::closeIf(Condition fits) {
     std::vector<std::function<void()>> closing;
     {
         const std::lock_guard lock(mutex_);
         for (auto& [address, peer] : peers_) {
             for (Entry& entry : peer) {
-                if (entry.state == State::handshaking && entry.entered < time && entry.close)
-                    closing.push_back(std::exchange(entry.close, nullptr));
+                if (fits(entry) && entry.close) closing.push_back(std::exchange(entry.close, nullptr));
             }
         }
     }
@@ -79,18 +79,13 @@ std::size_t ConnectionTable::closeHandshakesBefore(std::chrono::steady_clock::ti
     return closing.size();
 }
 
+std::size_t ConnectionTable::closeHandshakesBefore(std::chrono::steady_clock::time_point time) {
+    return closeIf(
+        [time](const Entry& entry) { return entry.state == State::handshaking && entry.entered < time; });
+}
+
 void ConnectionTable::closeSilent() {
-    std::vector<std::function<void()>> closing;
-    {
-        const std::lock_guard lock(mutex_);
-        for (auto& [address, peer] : peers_) {
-            for (Entry& entry : peer) {
-                if (entry.state <= State::silent && entry.close)
-                    closing.push_back(std::exchange(entry.close, nullptr));
-            }
-        }
-    }
-    for (const auto& close : closing) close();
+    closeIf([](const Entry& entry) { return entry.state <= State::silent; });
 }
 
 std::size_t ConnectionTable::count() const {

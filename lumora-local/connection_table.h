@@ -66,6 +66,10 @@ class ConnectionTable {
 
     void change(Identifier connection, State state);
 
+    /// Closes every connection whose entry fits. Returns their number.
+    template <class Condition>
+    std::size_t closeIf(Condition fits);
+
     const std::size_t perAddress_;
     mutable std::mutex mutex_;
     Identifier last_ = 0;

@@ -101,6 +101,13 @@ std::optional<RevokedElsewhere> revokedBeside(PostgresConnection& connection, En
     return RevokedElsewhere{parseEnvironment(rows.text(0, 0)).value_or(environment), rows.text(0, 1)};
 }
 
+Standing standingOf(PostgresConnection& connection, Environment environment, const Record& record,
+                    Deadline deadline) {
+    Standing standing{isRevoked(connection, environment, record.name, deadline), std::nullopt};
+    if (!record.revoked) standing.elsewhere = revokedBeside(connection, environment, record, deadline);
+    return standing;
+}
+
 std::vector<CodeHash> hashesOf(PostgresConnection& connection, Environment environment,
                                const std::string& name, Deadline deadline) {
     const PostgresRows rows = connection.query(
@@ -382,22 +389,20 @@ PutOutcome PostgresStore::put(Environment environment, const std::vector<SignedR
         PutOutcome outcome;
         PostgresBatch batch;
         for (const SignedRecord& entry : records) {
-            const std::optional<bool> before =
-                isRevoked(connection, environment, entry.record.name, deadline);
-            Standing standing{before, std::nullopt};
-            if (!entry.record.revoked)
-                standing.elsewhere = revokedBeside(connection, environment, entry.record, deadline);
-            const Action action = actionOf(environment, entry.record, standing, occasion);
-            SignedRecord kept = entry;
-            if (before) {
-                keepEarlierHashes(kept.record, hashesOf(connection, environment, kept.record.name, deadline));
+            const Standing before = standingOf(connection, environment, entry.record, deadline);
+            const Action action = actionOf(environment, entry.record, before, occasion);
+            std::optional<SignedRecord> joined;  // a ticket is copied only with an earlier one in the store
+            if (before.revoked) {
+                joined = entry;
+                keepEarlierHashes(joined->record,
+                                  hashesOf(connection, environment, entry.record.name, deadline));
                 connection.query("DELETE FROM record WHERE environment = $1 AND name = $2",
                                  {nameOf(environment), entry.record.name}, deadline);
             } else {
                 ++added;
             }
             const Event event = makeEvent(environment, entry, action, occasion, std::move(head.hash));
-            batch.add(environment, kept);
+            batch.add(environment, joined ? *joined : entry);
             batch.add(event, ++head.position);
             batch.write(connection, deadline);
             head.hash = event.hash;
