@@ -27,9 +27,9 @@ using foundation::Data;
 using foundation::FileDescriptor;
 using OpenKey = std::function<std::unique_ptr<DigestSigner>()>;
 
-// A question is the digest to sign. An answer is one byte, an exit status; two bytes, the length of the rest,
-// lowest first; and that many bytes, a signature or the text of a failure. The child first sends an answer
-// with the public key.
+// A request is the digest to sign. A response is one byte with an exit status, two bytes with the length of
+// the rest (little-endian), and the rest: a signature or the text of a failure. The child first sends a
+// response with the public key.
 constexpr std::size_t kDigestSize = 32;
 constexpr std::size_t kAnswerHead = 3;
 constexpr std::size_t kMaximumAnswer = 4096;
@@ -141,7 +141,7 @@ class KeyBehindProcess final : public SigningKey {
         throw Failure(EX_IOERR, "the process that speaks to the token has ended, or does not answer");
     }
 
-    /// A late answer is never mistaken for the next one: no question follows it.
+    /// No request follows a late response. So it is never taken for the response to another request.
     [[noreturn]] void giveUp() const {
         ours_.reset();
         failTalking();

@@ -1,4 +1,4 @@
-// Lookups of many records at the record service: takes names, returns one answer for each name.
+// Lookups of many records at the record service: takes names, returns one result for each name.
 //
 // Up to 200 names go into one request. The service must return exactly one record for each name, each with
 // its name, in the order of the request. Otherwise the names are looked up one by one; after a response with
@@ -32,9 +32,9 @@ class RecordService {
     RecordService(const RecordService&) = delete;
     RecordService& operator=(const RecordService&) = delete;
 
-    /// One answer for each of at most kNamesPerRequest names, in their order. Blocks, at most until
-    /// `deadline` if given; never throws for a server's behaviour. May be called from several threads at
-    /// once.
+    /// Returns one result for each name, in their order; at most kNamesPerRequest names. Blocks, at most
+    /// until `deadline` if given; never throws for a server's behaviour. May be called from several threads
+    /// at once.
     std::vector<Answer> lookUp(const std::vector<std::string>& names, const Cancellation& cancellation,
                                std::optional<Clock::time_point> deadline = std::nullopt);
 

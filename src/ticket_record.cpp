@@ -79,8 +79,8 @@ const std::string* TicketRecord::assetURLTemplate() const {
     return text == nullptr || text->empty() ? nullptr : text;
 }
 
-TicketRecord ticketRecordOf(const Value& answer) {
-    const Value& record = answer["records"][std::size_t{0}];
+TicketRecord ticketRecordOf(const Value& response) {
+    const Value& record = response["records"][std::size_t{0}];
     const Value& fields = record["fields"];
     const Value& ticket = fields["signedTicket"]["value"];
     const Value& asset = fields["signedTicketAsset"]["value"];

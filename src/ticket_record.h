@@ -57,9 +57,9 @@ struct TicketRecord {
     const std::string* assetURLTemplate() const;
 };
 
-/// The first record of an answer. Throws foundation::ValueTypeError or std::out_of_range if the answer has
+/// The first record of a response. Throws foundation::ValueTypeError or std::out_of_range if the response has
 /// another shape.
-TicketRecord ticketRecordOf(const foundation::Value& answer);
+TicketRecord ticketRecordOf(const foundation::Value& response);
 
 /// The faults of a downloaded asset, checked in this order.
 enum class AssetFault : std::uint8_t {

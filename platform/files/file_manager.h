@@ -172,7 +172,7 @@ class FileManager {
     virtual Result<Data> contentsOfFile(const URL& file) = 0;
 
     /// Writes a file of mode 0600 and flushes its contents to stable storage. `atomic` writes a file beside
-    /// it and renames it into place, over anything except a directory; a failure leaves nothing behind.
+    /// it and renames it into place; only a directory is not replaced. A failure leaves no file behind.
     /// `plain` makes a new file, with its name on stable storage too, and removes it on failure; or
     /// overwrites an existing regular file, which a failure leaves half written.
     enum class Writing { plain, atomic };

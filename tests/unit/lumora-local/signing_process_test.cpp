@@ -76,7 +76,7 @@ TEST(SigningProcess, PassesOnWhyTheKeyCannotBeOpened) {
 TEST(SigningProcess, GivesUpATokenThatDoesNotAnswer) {
     auto key = keyWith([](const Data&) { ::pause(); }, milliseconds(50));
     EXPECT_EQ(failureOf(*key), kGone);
-    // A late answer is not mistaken for the answer to another message.
+    // A late response is not taken for the response to another message.
     EXPECT_EQ(failureOf(*key), kGone);
     key.reset();  // does not wait for the child either
 }
