@@ -19,7 +19,7 @@ std::string printable(std::string_view text) {
 }
 
 /// In quotes that the text cannot end.
-std::string quoted(std::string_view text) {
+std::string inQuotes(std::string_view text) {
     std::string line = "\"";
     for (const char c : text) {
         if (c == '"' || c == '\\') line += '\\';
@@ -39,9 +39,9 @@ std::string describeRequest(const RequestEntry& entry, LogForm form) {
     if (form == LogForm::text) {
         std::string line =
             foundation::format("%@ %s %s %d %zu %s", entry.time, entry.peer,
-                               quoted(std::string(entry.method) + ' ' + std::string(entry.target)),
+                               inQuotes(std::string(entry.method) + ' ' + std::string(entry.target)),
                                entry.status, entry.size, entry.identifier);
-        if (!entry.client.empty()) line += ' ' + quoted(entry.client);
+        if (!entry.client.empty()) line += ' ' + inQuotes(entry.client);
         return line;
     }
     Array records;
