@@ -236,7 +236,9 @@ class WrongRequestAnswer : public Request, public testing::WithParamInterface<Wr
         for (const std::string key : {"record", "action", "ticket", "event"})
             for (const auto& [title, value] : std::vector<std::pair<std::string, std::string>>{
                      {"Without", ""}, {"Number", "7"}, {"Null", "null"}, {"Array", "[]"}, {"Empty", "\"\""}})
-                answers.push_back({title + key, [=](Members members) { return with(members, key, value); }});
+                answers.push_back({title + key, [key, wrong = value](Members members) {
+                                       return with(members, key, wrong);
+                                   }});
         answers.push_back({"OtherRecord", [](Members members) {
                                return with(std::move(members), "record", quoted(Request::nameOf(2)));
                            }});

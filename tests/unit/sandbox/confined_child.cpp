@@ -38,8 +38,8 @@ void takeAway(Missing missing) {
         refuse(filter, ENOSYS, SCMP_SYS(landlock_create_ruleset));
     } else {
         refuse(filter, ENOSYS, SCMP_SYS(seccomp));
-        seccomp_rule_add(filter, SCMP_ACT_ERRNO(EINVAL), SCMP_SYS(prctl), 1,
-                         SCMP_A0(SCMP_CMP_EQ, PR_SET_SECCOMP));
+        const scmp_arg_cmp setsFilter{.arg = 0, .op = SCMP_CMP_EQ, .datum_a = PR_SET_SECCOMP, .datum_b = 0};
+        seccomp_rule_add(filter, SCMP_ACT_ERRNO(EINVAL), SCMP_SYS(prctl), 1, setsFilter);
     }
     if (seccomp_load(filter) != 0) _exit(kUnconfined);
     seccomp_release(filter);
