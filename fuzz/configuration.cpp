@@ -45,15 +45,14 @@ void examineDefaults() {
 void examineRoots(const foundation::PlatformDirectory& directory, ByteView leaf) {
     const auto service = trust::makeTrustService(
         directory, [](std::string_view) {}, [] { return foundation::Date{1795204500}; });
-    const auto certificate = service->createCertificate(leaf);
+    const auto certificate = service->parseCertificate(leaf);
     auto policy = std::make_shared<trust::Policy>();
     policy->options.emplace(trust::option::kIdLinkage, true);
-    std::shared_ptr<trust::Trust> evaluated;
-    require(service->createTrust({certificate}, policy, evaluated) == trust::kSuccess,
-            "there is a trust object");
-    trust::Verdict verdict = trust::Verdict::invalid;
-    require(evaluated->evaluate(verdict) == trust::kSuccess, "there is a verdict");
-    require(verdict != trust::Verdict::unspecified, "a leaf is not trusted without its issuers");
+    const auto object = service->makeTrust({certificate}, policy);
+    require(object.has_value(), "there is a trust object");
+    const auto verdict = (*object)->evaluate();
+    require(verdict.has_value(), "there is a verdict");
+    require(*verdict != trust::Verdict::unspecified, "a leaf is not trusted without its issuers");
 }
 
 }  // namespace

@@ -91,7 +91,7 @@ std::optional<Fault> certificateFaultOf(ByteView block, std::uint64_t base, cons
 void judgeChain(ByteView bytes, const satchel_view& view, trust::TrustService& service, Ticket& into) {
     std::vector<trust::CertificateRef> list;
     for (const Certificate& one : into.certificates)
-        if (auto certificate = service.createCertificate(bytes.subspan(one.range.offset, one.range.length)))
+        if (auto certificate = service.parseCertificate(bytes.subspan(one.range.offset, one.range.length)))
             list.push_back(std::move(certificate));
     if (list.empty()) {
         into.chain.reason = "there is no certificate that can be read";
@@ -101,7 +101,7 @@ void judgeChain(ByteView bytes, const satchel_view& view, trust::TrustService& s
     into.chain.trusted = chain.isTrusted();
     into.chain.reason = chain.problem;
     if (chain.evaluated == nullptr) return;
-    for (const foundation::Value& one : chain.evaluated->copyProperties()) {
+    for (const foundation::Value& one : chain.evaluated->properties()) {
         const std::string* const title = one[trust::kPropertyTitle].string();
         const std::string* const error = one[trust::kPropertyError].string();
         into.chain.links.push_back({title == nullptr ? "" : *title, error == nullptr ? "" : *error});
@@ -110,7 +110,7 @@ void judgeChain(ByteView bytes, const satchel_view& view, trust::TrustService& s
     // Without the signer's own certificate the list begins with another, whose key proves nothing.
     const bool signerIsReadable =
         into.unreadable.empty() || into.certificates.front().range.offset < into.unreadable.front().offset;
-    const trust::PublicKeyRef key = chain.evaluated->copyPublicKey();
+    const trust::PublicKeyRef key = chain.evaluated->publicKey();
     if (key == nullptr || !signerIsReadable) return;
     const auto status = _satchel_validate_signature(*key, ByteView(view.signed_data, view.signed_data_length),
                                                     ByteView(view.signature, view.signature_length), service);

@@ -14,10 +14,9 @@ bool isSuccess(trust::Verdict verdict) {
 }
 
 void reportRefusal(const trust::Trust& serverTrust, trust::Verdict verdict) {
-    const foundation::Array properties = serverTrust.copyProperties();
+    const foundation::Array properties = serverTrust.properties();
     MessageLog("Certificate trust evaluation did not return expected result. (%d) %@",
-               static_cast<std::uint32_t>(verdict),
-               serverTrust.copyFailureDescription().value_or(std::string()));
+               static_cast<std::uint32_t>(verdict), serverTrust.failureDescription().value_or(std::string()));
     for (const foundation::Value& certificate : properties) {
         const foundation::Value& error = certificate[trust::kPropertyError];
         if (error.isNil()) continue;
@@ -27,17 +26,17 @@ void reportRefusal(const trust::Trust& serverTrust, trust::Verdict verdict) {
 }
 
 bool accepts(trust::Trust& serverTrust, const trust::PolicyRef& policy) {
-    if (const trust::Status status = serverTrust.setPolicy(policy); status != trust::kSuccess) {
-        NoisyLog("Could not set trust policy. %@", Error::osStatus(status));
+    if (const auto set = serverTrust.setPolicy(policy); !set) {
+        NoisyLog("Could not set trust policy. %@", set.error());
         return false;
     }
-    auto verdict = trust::Verdict::invalid;
-    if (const trust::Status status = serverTrust.evaluate(verdict); status != trust::kSuccess) {
-        MessageLog("Certificate trust evaluation failed. %@", Error::osStatus(status));
+    const auto verdict = serverTrust.evaluate();
+    if (!verdict) {
+        MessageLog("Certificate trust evaluation failed. %@", verdict.error());
         return false;
     }
-    if (isSuccess(verdict)) return true;
-    reportRefusal(serverTrust, verdict);
+    if (isSuccess(*verdict)) return true;
+    reportRefusal(serverTrust, *verdict);
     return false;
 }
 
@@ -56,8 +55,8 @@ void answerServerChallenge(const https::AuthenticationChallenge& challenge,
         return;
     }
     std::vector<trust::PolicyRef> policies;
-    for (auto policy : {trust::createPinnedServerPolicy(challenge.host),
-                        trust::createCompatibilityServerPolicy(challenge.host)})
+    for (auto policy :
+         {trust::pinnedServerPolicy(challenge.host), trust::compatibilityServerPolicy(challenge.host)})
         if (policy != nullptr) policies.push_back(std::move(policy));
     if (policies.empty()) {
         completion(https::Disposition::cancelChallenge, std::nullopt);

@@ -5,28 +5,36 @@ namespace pinwell {
 using foundation::Dictionary;
 using foundation::Value;
 
+namespace {
+
+template <class T>
+codesign::Status statusOf(const foundation::Result<T>& result) {
+    return result ? codesign::kSuccess : result.error().statusOr(codesign::kInvalidSignature);
+}
+
+}  // namespace
+
 foundation::Dictionary basicCodeProperties(const foundation::URL& fileURL, const Platform& platform) {
-    std::shared_ptr<codesign::StaticCode> code;
-    codesign::Status status = platform.codeSigning.createStaticCode(fileURL, 0, code);
-    if (status != codesign::kSuccess || code == nullptr) {
-        platform.systemLog.error("Unable to create SecCode (%d): %@", status, fileURL.path());
+    const auto code = platform.codeSigning.staticCode(fileURL, 0);
+    if (!code || *code == nullptr) {
+        platform.systemLog.error("Unable to create SecCode (%d): %@", statusOf(code), fileURL.path());
         return {};
     }
 
     // This tool does not judge the executable's pages and the sealed resources: the ticket vouches for the
     // hash.
-    status = platform.codeSigning.checkValidity(
-        *code, codesign::kDoNotValidateExecutable | codesign::kDoNotValidateResources);
-    if (status != codesign::kSuccess) return {};
+    if (!platform.codeSigning.checkValidity(
+            **code, codesign::kDoNotValidateExecutable | codesign::kDoNotValidateResources))
+        return {};
 
-    std::optional<codesign::SigningInformation> information;
-    status = platform.codeSigning.copySigningInformation(
-        *code, codesign::kInternalInformation | codesign::kSigningInformation | codesign::kContentInformation,
-        information);
-    if (status != codesign::kSuccess) {
-        platform.systemLog.error("Unable to copy signing information (%d)", status);
+    const auto found = platform.codeSigning.signingInformation(**code, codesign::kInternalInformation |
+                                                                           codesign::kSigningInformation |
+                                                                           codesign::kContentInformation);
+    if (!found) {
+        platform.systemLog.error("Unable to copy signing information (%d)", statusOf(found));
         return {};
     }
+    const std::optional<codesign::SigningInformation>& information = *found;
     if (!information) {
         platform.systemLog.error("Unable to copy signing information from code reference.");
         return {};

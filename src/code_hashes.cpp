@@ -21,11 +21,11 @@ std::vector<CodeHash> listableHashes(const CodeHash& own, const std::vector<Code
 }
 
 std::vector<CodeHash> listableHashes(const CodeHash& own, const foundation::URL& artefact,
-                                     codesign::CodeSigningService& codeSigning) {
-    std::vector<codesign::SigningInformation> all;
-    if (codeSigning.copyAllCodeHashes(artefact, all) != codesign::kSuccess) return {own};
+                                     const codesign::CodeSigningService& codeSigning) {
+    const auto all = codeSigning.allCodeHashes(artefact);
+    if (!all) return {own};
     std::vector<CodeHash> found;
-    for (const codesign::SigningInformation& code : all)
+    for (const codesign::SigningInformation& code : *all)
         for (std::size_t i = 0; i < code.cdHashes.size() && i < code.digestAlgorithms.size(); ++i)
             found.push_back({code.digestAlgorithms[i], code.cdHashes[i]});
     return listableHashes(own, found);

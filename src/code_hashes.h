@@ -27,6 +27,6 @@ std::vector<CodeHash> listableHashes(const CodeHash& own, const std::vector<Code
 /// The same with the hashes of all slices and of nested code of the artefact at this path. An unsigned disk
 /// image or a package has only its own. Reads files; blocks.
 std::vector<CodeHash> listableHashes(const CodeHash& own, const foundation::URL& artefact,
-                                     codesign::CodeSigningService& codeSigning);
+                                     const codesign::CodeSigningService& codeSigning);
 
 }  // namespace pinwell

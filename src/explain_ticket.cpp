@@ -66,7 +66,7 @@ class Explanation {
     }
 
     bool checkSignature() {
-        const trust::PublicKeyRef key = trust_->copyPublicKey();
+        const trust::PublicKeyRef key = trust_->publicKey();
         const bool verifies =
             key != nullptr &&
             _satchel_validate_signature(*key, ByteView(view_.signed_data, view_.signed_data_length),
@@ -137,7 +137,7 @@ std::optional<TicketRefusal> explainCertificates(ByteView block, const satchel_c
                                                  trust::TrustService& service,
                                                  std::vector<trust::CertificateRef>* certificates) {
     for (std::size_t i = 0; i < survey.count; ++i) {
-        trust::CertificateRef certificate = service.createCertificate(survey.elements[i]);
+        trust::CertificateRef certificate = service.parseCertificate(survey.elements[i]);
         if (certificate == nullptr)
             return TicketRefusal{RefusalStep::certificates,
                                  static_cast<std::uint64_t>(survey.elements[i].data() - block.data()),
@@ -157,7 +157,7 @@ std::string JudgedChain::reason() const {
 std::optional<std::size_t> JudgedChain::faultyCertificate(
     const std::vector<trust::CertificateRef>& certificates) const {
     if (evaluated == nullptr) return std::nullopt;
-    for (const foundation::Value& link : evaluated->copyProperties()) {
+    for (const foundation::Value& link : evaluated->properties()) {
         const std::string* const title = link[trust::kPropertyTitle].string();
         const std::string* const error = link[trust::kPropertyError].string();
         if (title == nullptr || error == nullptr || error->empty() || !problem.ends_with(*error)) continue;
@@ -176,18 +176,19 @@ JudgedChain judgeTicketChain(const std::vector<trust::CertificateRef>& certifica
         chain.problem = "the platform security library has no policy for tickets";
         return chain;
     }
-    std::shared_ptr<trust::Trust> object;
-    const bool isJudged = service.createTrust(certificates, policy, object) == trust::kSuccess &&
-                          object != nullptr && object->evaluate(chain.verdict) == trust::kSuccess;
-    if (!isJudged) {
+    const auto object = service.makeTrust(certificates, policy);
+    const auto verdict = object && *object != nullptr ? (*object)->evaluate()
+                                                      : foundation::Error::osStatus(trust::kParameterError);
+    if (!verdict) {
         chain.problem = "the chain could not be judged";
         return chain;
     }
-    chain.evaluated = std::move(object);
+    chain.verdict = *verdict;
+    chain.evaluated = *object;
     if (chain.verdict == trust::Verdict::proceed)
         chain.problem = "only the user's own settings trust the chain, which is not enough for a ticket";
     else if (chain.verdict != trust::Verdict::unspecified)
-        chain.problem = chain.evaluated->copyFailureDescription().value_or("no reason is known");
+        chain.problem = chain.evaluated->failureDescription().value_or("no reason is known");
     return chain;
 }
 

@@ -26,7 +26,6 @@ using foundation::asBytes;
 using foundation::ByteReader;
 using foundation::ByteView;
 using foundation::Dictionary;
-using foundation::Error;
 using foundation::Value;
 
 // A caller's mistake, not a file's fault: no buffer can be there.
@@ -138,7 +137,7 @@ trust::Status verify(const satchel_view& view, trust::TrustService& service) {
     result = _satchel_create_trust(certificates, policy, &evaluated, service);
     if (result != status::kSuccess) return result;
 
-    const trust::PublicKeyRef key = evaluated->copyPublicKey();
+    const trust::PublicKeyRef key = evaluated->publicKey();
     if (key == nullptr) return status::kNotAvailable;
 
     return _satchel_validate_signature(*key, ByteView(view.signed_data, view.signed_data_length),
@@ -245,7 +244,7 @@ trust::Status _satchel_copy_certificates(ByteView block, std::vector<trust::Cert
     std::vector<trust::CertificateRef> found;
     found.reserve(kSatchelMaximumCertificates);
     for (const ByteView element : std::span(survey.elements).first(survey.count)) {
-        trust::CertificateRef certificate = service.createCertificate(element);
+        trust::CertificateRef certificate = service.parseCertificate(element);
         if (certificate == nullptr) return status::kBadCertificates;
         found.push_back(std::move(certificate));
     }
@@ -258,15 +257,10 @@ trust::Status _satchel_copy_certificates(ByteView block, std::vector<trust::Cert
 trust::Status _satchel_create_cert_policy(trust::PolicyRef* policy, trust::TrustService& service) {
     if (policy == nullptr) return status::kBadParameter;
     policy->reset();
-    switch (service.createNamedPolicy(kTicketPolicyConstructor, *policy)) {
-        case trust::NamedPolicyOutcome::created:
-            return *policy != nullptr ? status::kSuccess : status::kNoPolicy;
-        case trust::NamedPolicyOutcome::refused:
-            // The platform refused: our own policy must not replace its decision.
-            policy->reset();
-            return status::kNoPolicy;
-        case trust::NamedPolicyOutcome::unavailable:
-            break;
+    if (std::optional<trust::PolicyRef> named = service.namedPolicy(kTicketPolicyConstructor)) {
+        // Without a policy the platform refused: our own policy must not replace its decision.
+        *policy = std::move(*named);
+        return *policy != nullptr ? status::kSuccess : status::kNoPolicy;
     }
     return guardMemory([&] { return createLocalPolicy(policy); });
 }
@@ -298,28 +292,22 @@ trust::Status _satchel_create_trust(const std::vector<trust::CertificateRef>& ce
     if (evaluated == nullptr) return status::kBadParameter;
     evaluated->reset();
 
-    std::shared_ptr<trust::Trust> object;
-    trust::Status result = service.createTrust(certificates, policy, object);
-    if (result != trust::kSuccess) return result;
-    if (object == nullptr) return status::kNotAvailable;
+    const auto object = service.makeTrust(certificates, policy);
+    if (!object) return object.error().statusOr(status::kNotAvailable);
+    if (*object == nullptr) return status::kNotAvailable;
 
-    trust::Verdict verdict = trust::Verdict::invalid;
-    result = object->evaluate(verdict);
-    if (result != trust::kSuccess) return result;
-    if (verdict != trust::Verdict::unspecified) return status::kNotTrusted;
+    const auto verdict = (*object)->evaluate();
+    if (!verdict) return verdict.error().statusOr(status::kNotAvailable);
+    if (*verdict != trust::Verdict::unspecified) return status::kNotTrusted;
 
-    *evaluated = std::move(object);
+    *evaluated = *object;
     return status::kSuccess;
 }
 
 trust::Status _satchel_validate_signature(const trust::PublicKey& key, ByteView signed_data,
                                           ByteView signature, trust::TrustService& service) {
-    const std::optional<Error> error = service.verifySignature(key, signed_data, signature);
-    if (!error) return status::kSuccess;
-    // A code of another domain is not a status, and a code that does not fit could be truncated to success.
-    const bool isStatus = error->domain() == foundation::kOSStatusErrorDomain && error->code() != 0 &&
-                          std::in_range<trust::Status>(error->code());
-    return isStatus ? static_cast<trust::Status>(error->code()) : status::kBadSignature;
+    const auto verified = service.verifySignature(key, signed_data, signature);
+    return verified ? status::kSuccess : verified.error().statusOr(status::kBadSignature);
 }
 
 trust::PolicyRef satchel_make_policy(const std::string* oid, const std::string* name,

@@ -37,7 +37,7 @@ class CodeSignature {
     /// directory, or the ad-hoc flag is set and there is no message.
     void requireValid() const;
 
-    /// `sets` is as for CodeSigningService::copySigningInformation.
+    /// `sets` is as for CodeSigningService::signingInformation.
     SigningInformation information(std::uint32_t sets) const;
 
   private:

@@ -12,6 +12,7 @@
 
 #include "foundation/bytes.h"
 #include "foundation/date.h"
+#include "foundation/error.h"
 #include "foundation/places.h"
 #include "foundation/url.h"
 
@@ -19,6 +20,7 @@ namespace pinwell::codesign {
 
 using foundation::Data;
 using foundation::Date;
+using foundation::Result;
 using foundation::URL;
 
 /// A platform status; 0 is success.
@@ -37,7 +39,7 @@ enum class DigestType : std::uint8_t { sha1 = 1, sha256 = 2, sha256Truncated = 3
 /// Code-directory flag: ad hoc, without a signer.
 inline constexpr std::uint32_t kFlagAdHoc = 0x2;
 
-/// The result of copySigningInformation; empty for unsigned code. The lists are parallel: one entry
+/// The contents of a signature; empty for unsigned code. The lists are parallel: one entry
 /// for each code directory, the chosen (strongest) one first. The single values are from the chosen
 /// one.
 struct SigningInformation {
@@ -83,8 +85,8 @@ class Signer {
     virtual ~Signer() = default;
 };
 
-/// Out-parameters are written only on success. Every method returns kParameterError for an object of another
-/// service.
+/// An error has the domain kOSStatusErrorDomain and one of the statuses above as its code; kParameterError
+/// for an object of another service.
 class CodeSigningService {
   public:
     virtual ~CodeSigningService() = default;
@@ -92,32 +94,36 @@ class CodeSigningService {
     /// A reference to the code at `path`: a bundle's main executable, a bundle's separate signature files, an
     /// executable image (thin, or the preferred slice of a universal one) or a disk image. Only finds it;
     /// checkValidity judges the signature.
-    virtual Status createStaticCode(const URL& path, std::uint32_t flags,
-                                    std::shared_ptr<StaticCode>& code) = 0;
+    virtual Result<std::shared_ptr<StaticCode>> staticCode(const URL& path, std::uint32_t flags) const = 0;
 
     /// Static validity on this platform: structure, component digests and the CMS signature. Page hashes and
     /// sealed resources are not checked (exactly the two "do not validate" flags must be given; otherwise
     /// returns kUnimplemented). Returns kUnsigned if there is no code directory, kInvalidSignature for any
     /// fault.
-    virtual Status checkValidity(StaticCode& code, std::uint32_t flags) = 0;
+    virtual Result<void> checkValidity(const StaticCode& code, std::uint32_t flags) const = 0;
 
-    virtual Status copySigningInformation(StaticCode& code, std::uint32_t sets,
-                                          std::optional<SigningInformation>& information) = 0;
+    /// The contents of the code's signature. Callers treat `nullopt` as missing information.
+    virtual Result<std::optional<SigningInformation>> signingInformation(const StaticCode& code,
+                                                                         std::uint32_t sets) const = 0;
 
     /// A signer for addSignature; `flags` must be kSignOpaque. A service that does not sign need not override
     /// this method and the next two.
-    virtual Status createSigner(const SignerParameters&, std::uint32_t /*flags*/, std::shared_ptr<Signer>&) {
-        return kUnimplemented;
+    virtual Result<std::shared_ptr<Signer>> makeSigner(const SignerParameters&,
+                                                       std::uint32_t /*flags*/) const {
+        return foundation::Error::osStatus(kUnimplemented);
     }
 
     /// Signs the file of `code` ad hoc, and replaces the contents of the signer's detached buffer. Reads
     /// every byte of the file, with bounded memory. `flags` must be 0. The same bytes give the same
     /// signature.
-    virtual Status addSignature(Signer&, StaticCode&, std::uint32_t /*flags*/) { return kUnimplemented; }
+    virtual Result<void> addSignature(Signer&, const StaticCode&, std::uint32_t /*flags*/) const {
+        return foundation::Error::osStatus(kUnimplemented);
+    }
 
     /// From now on `code` is described by the signature in `detached`. `flags` must be 0.
-    virtual Status setDetachedSignature(StaticCode&, const Data& /*detached*/, std::uint32_t /*flags*/) {
-        return kUnimplemented;
+    virtual Result<void> setDetachedSignature(StaticCode&, const Data& /*detached*/,
+                                              std::uint32_t /*flags*/) const {
+        return foundation::Error::osStatus(kUnimplemented);
     }
 
     /// Every code hash of the artefact at `path`: the cdhashes of all code directories of all signed slices,
@@ -125,7 +131,7 @@ class CodeSigningService {
     /// tickets. The artefact's own signatures must be valid (kInvalidSignature); invalid nested code is
     /// skipped. Returns kUnsigned if nothing is signed, kUnimplemented for a bundle beyond the limits of the
     /// walk.
-    virtual Status copyAllCodeHashes(const URL& path, std::vector<SigningInformation>& all) = 0;
+    virtual Result<std::vector<SigningInformation>> allCodeHashes(const URL& path) const = 0;
 };
 
 /// The service over files of this machine. Paths are resolved through `places`: a held item is reached only

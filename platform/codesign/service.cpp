@@ -2,6 +2,7 @@
 
 #include <iterator>
 #include <set>
+#include <type_traits>
 
 #include "codesign/adhoc_signer.h"
 #include "codesign/code_error.h"
@@ -12,20 +13,22 @@ namespace pinwell::codesign {
 
 namespace {
 
+using foundation::Error;
+
 /// Longest identifier; real ones are about as long as a domain name.
 constexpr std::size_t kMaximumIdentifierLength = 1024;
 
 constexpr std::uint32_t kRequiredValidityFlags = kDoNotValidateExecutable | kDoNotValidateResources;
 
-/// Runs `body`, which returns a status; turns its exceptions into a status.
+/// Runs `body`; turns its exceptions into the status that they stand for.
 template <class Body>
-Status asStatus(Body body) {
+auto guarded(Body body) -> decltype(body()) {
     try {
         return body();
     } catch (const CodeError& error) {
-        return error.status();
+        return Error::osStatus(error.status());
     } catch (const foundation::ShortRead&) {
-        return kInvalidSignature;
+        return Error::osStatus(kInvalidSignature);
     }
 }
 
@@ -34,8 +37,11 @@ struct OpaqueSigner final : Signer {
     std::shared_ptr<Data> signature;
 };
 
-FileCode& fileCode(StaticCode& code) {
-    auto* own = dynamic_cast<FileCode*>(&code);
+/// `Code` is StaticCode, const or not.
+template <class Code>
+auto& fileCode(Code& code) {
+    using Own = std::conditional_t<std::is_const_v<Code>, const FileCode, FileCode>;
+    auto* const own = dynamic_cast<Own*>(&code);
     if (own == nullptr) throw CodeError(kParameterError, "code of another service");
     return *own;
 }
@@ -47,70 +53,69 @@ std::shared_ptr<FileCode> codeAt(const URL& url, const CodeAccess& access) {
 
 }  // namespace
 
-Status FileCodeSigningService::createStaticCode(const URL& path, std::uint32_t flags,
-                                                std::shared_ptr<StaticCode>& code) {
-    return asStatus([&] {
-        if (flags != 0) return kParameterError;
-        code = codeAt(path, access_);
-        return kSuccess;
+Result<std::shared_ptr<StaticCode>> FileCodeSigningService::staticCode(const URL& path,
+                                                                       std::uint32_t flags) const {
+    return guarded([&]() -> Result<std::shared_ptr<StaticCode>> {
+        if (flags != 0) return Error::osStatus(kParameterError);
+        return std::shared_ptr<StaticCode>(codeAt(path, access_));
     });
 }
 
-Status FileCodeSigningService::checkValidity(StaticCode& code, std::uint32_t flags) {
-    return asStatus([&] {
-        if (flags != kRequiredValidityFlags) return kUnimplemented;
+Result<void> FileCodeSigningService::checkValidity(const StaticCode& code, std::uint32_t flags) const {
+    return guarded([&]() -> Result<void> {
+        if (flags != kRequiredValidityFlags) return Error::osStatus(kUnimplemented);
         const std::optional<CodeSignature>& signature = fileCode(code).signature();
-        if (!signature) return kUnsigned;
+        if (!signature) return Error::osStatus(kUnsigned);
         signature->requireValid();
-        return kSuccess;
+        return {};
     });
 }
 
-Status FileCodeSigningService::copySigningInformation(StaticCode& code, std::uint32_t sets,
-                                                      std::optional<SigningInformation>& information) {
-    return asStatus([&] {
+Result<std::optional<SigningInformation>> FileCodeSigningService::signingInformation(
+    const StaticCode& code, std::uint32_t sets) const {
+    return guarded([&]() -> Result<std::optional<SigningInformation>> {
         const std::optional<CodeSignature>& signature = fileCode(code).signature();
-        information = signature ? signature->information(sets) : SigningInformation();
-        return kSuccess;
+        return std::optional(signature ? signature->information(sets) : SigningInformation());
     });
 }
 
-Status FileCodeSigningService::createSigner(const SignerParameters& parameters, std::uint32_t flags,
-                                            std::shared_ptr<Signer>& signer) {
-    if (flags != kSignOpaque || parameters.digestAlgorithm != DigestType::sha256) return kUnimplemented;
-    if (!parameters.detachedSignature) return kParameterError;
+Result<std::shared_ptr<Signer>> FileCodeSigningService::makeSigner(const SignerParameters& parameters,
+                                                                   std::uint32_t flags) const {
+    if (flags != kSignOpaque || parameters.digestAlgorithm != DigestType::sha256)
+        return Error::osStatus(kUnimplemented);
+    if (!parameters.detachedSignature) return Error::osStatus(kParameterError);
     if (parameters.identifier.empty() || parameters.identifier.size() > kMaximumIdentifierLength ||
         parameters.identifier.find('\0') != std::string::npos) {
-        return kParameterError;
+        return Error::osStatus(kParameterError);
     }
     auto opaque = std::make_shared<OpaqueSigner>();
     opaque->identifier = parameters.identifier;
     opaque->signature = parameters.detachedSignature;
-    signer = std::move(opaque);
-    return kSuccess;
+    return std::shared_ptr<Signer>(std::move(opaque));
 }
 
-Status FileCodeSigningService::addSignature(Signer& signer, StaticCode& code, std::uint32_t flags) {
-    return asStatus([&] {
+Result<void> FileCodeSigningService::addSignature(Signer& signer, const StaticCode& code,
+                                                  std::uint32_t flags) const {
+    return guarded([&]() -> Result<void> {
         const auto* opaque = dynamic_cast<OpaqueSigner*>(&signer);
-        if (opaque == nullptr || flags != 0) return kParameterError;
+        if (opaque == nullptr || flags != 0) return Error::osStatus(kParameterError);
         const FileCode& file = fileCode(code);
         *opaque->signature = signOpaque(file.source(), file.trailer(), opaque->identifier);
-        return kSuccess;
+        return {};
     });
 }
 
-Status FileCodeSigningService::setDetachedSignature(StaticCode& code, const Data& detached,
-                                                    std::uint32_t flags) {
-    return asStatus([&] {
-        if (flags != 0) return kParameterError;
+Result<void> FileCodeSigningService::setDetachedSignature(StaticCode& code, const Data& detached,
+                                                          std::uint32_t flags) const {
+    return guarded([&]() -> Result<void> {
+        if (flags != 0) return Error::osStatus(kParameterError);
         fileCode(code).setDetachedSignature(detached);
-        return kSuccess;
+        return {};
     });
 }
 
-Status FileCodeSigningService::copyAllCodeHashes(const URL& path, std::vector<SigningInformation>& all) {
-    return asStatus([&] {
+Result<std::vector<SigningInformation>> FileCodeSigningService::allCodeHashes(const URL& path) const {
+    return guarded([&]() -> Result<std::vector<SigningInformation>> {
         const std::shared_ptr<FileCode> code = codeAt(path, access_);
         std::vector<CodeSignature> signatures = code->allSignatures();
         for (const CodeSignature& signature : signatures) signature.requireValid();
@@ -125,9 +130,8 @@ Status FileCodeSigningService::copyAllCodeHashes(const URL& path, std::vector<Si
             SigningInformation information = signature.information(kSigningInformation);
             if (known.insert(information.cdHashes).second) found.push_back(std::move(information));
         }
-        if (found.empty()) return kUnsigned;
-        all = std::move(found);
-        return kSuccess;
+        if (found.empty()) return Error::osStatus(kUnsigned);
+        return found;
     });
 }
 

@@ -9,15 +9,16 @@ class FileCodeSigningService final : public CodeSigningService {
   public:
     explicit FileCodeSigningService(CodeAccess access) : access_(std::move(access)) {}
 
-    Status createStaticCode(const URL& path, std::uint32_t flags, std::shared_ptr<StaticCode>& code) override;
-    Status checkValidity(StaticCode& code, std::uint32_t flags) override;
-    Status copySigningInformation(StaticCode& code, std::uint32_t sets,
-                                  std::optional<SigningInformation>& information) override;
-    Status createSigner(const SignerParameters& parameters, std::uint32_t flags,
-                        std::shared_ptr<Signer>& signer) override;
-    Status addSignature(Signer& signer, StaticCode& code, std::uint32_t flags) override;
-    Status setDetachedSignature(StaticCode& code, const Data& detached, std::uint32_t flags) override;
-    Status copyAllCodeHashes(const URL& path, std::vector<SigningInformation>& all) override;
+    Result<std::shared_ptr<StaticCode>> staticCode(const URL& path, std::uint32_t flags) const override;
+    Result<void> checkValidity(const StaticCode& code, std::uint32_t flags) const override;
+    Result<std::optional<SigningInformation>> signingInformation(const StaticCode& code,
+                                                                 std::uint32_t sets) const override;
+    Result<std::shared_ptr<Signer>> makeSigner(const SignerParameters& parameters,
+                                               std::uint32_t flags) const override;
+    Result<void> addSignature(Signer& signer, const StaticCode& code, std::uint32_t flags) const override;
+    Result<void> setDetachedSignature(StaticCode& code, const Data& detached,
+                                      std::uint32_t flags) const override;
+    Result<std::vector<SigningInformation>> allCodeHashes(const URL& path) const override;
 
   private:
     CodeAccess access_;

@@ -108,15 +108,12 @@ std::optional<CodeSignature> FileCode::readSignature() const {
     return signatureFrom(readSuperBlob(*source_, area->offset, area->length));
 }
 
-const std::optional<CodeSignature>& FileCode::signature() {
-    if (!signatureRead_) {
-        signature_ = readSignature();
-        signatureRead_ = true;
-    }
-    return signature_;
+const std::optional<CodeSignature>& FileCode::signature() const {
+    if (!signature_) signature_ = std::make_optional(readSignature());
+    return *signature_;
 }
 
-std::vector<CodeSignature> FileCode::allSignatures() {
+std::vector<CodeSignature> FileCode::allSignatures() const {
     std::vector<CodeSignature> all;
     if (kind_ != CodeKind::executableImage) {
         if (signature()) all.push_back(*signature());
@@ -135,8 +132,7 @@ std::vector<CodeSignature> FileCode::allSignatures() {
 void FileCode::setDetachedSignature(const SharedBytes& superblob) {
     std::optional<CodeSignature> detached = signatureFrom(superblob);
     if (!detached) refuse("the detached signature has no code directory");
-    signature_ = std::move(detached);
-    signatureRead_ = true;
+    signature_ = std::make_optional(std::move(detached));
 }
 
 }  // namespace pinwell::codesign

@@ -72,11 +72,11 @@ class FileCode final : public StaticCode {
     SignatureComponents completed(SignatureComponents components) const;
 
     /// The signature; `nullopt` if the code is not signed. Throws CodeError or foundation::ShortRead.
-    const std::optional<CodeSignature>& signature();
+    const std::optional<CodeSignature>& signature() const;
 
     /// The signatures of all slices, in the order of the slices; the code's only signature if there are no
     /// slices. Unsigned slices have no entry. Throws CodeError or foundation::ShortRead.
-    std::vector<CodeSignature> allSignatures();
+    std::vector<CodeSignature> allSignatures() const;
 
     /// Uses the signature in `superblob` from now on. Throws CodeError or foundation::ShortRead.
     void setDetachedSignature(const SharedBytes& superblob);
@@ -96,8 +96,9 @@ class FileCode final : public StaticCode {
     std::string signatureDirectory_;  // of a bundle; empty for a plain file
     std::shared_ptr<foundation::Places> places_;
     foundation::Anchor anchor_;  // of the code's path
-    std::optional<CodeSignature> signature_;
-    bool signatureRead_ = false;
+
+    // Read on first use; the inner one is empty for unsigned code.
+    mutable std::optional<std::optional<CodeSignature>> signature_;
 };
 
 }  // namespace pinwell::codesign

@@ -37,6 +37,12 @@ Error Error::osStatus(std::int32_t status) {
             text.empty() ? fmt::format("Status {}.", status) : std::string(text)};
 }
 
+std::int32_t Error::statusOr(std::int32_t other) const noexcept {
+    // A number that does not fit could be truncated to success.
+    const bool isStatus = domain_ == kOSStatusErrorDomain && code_ != 0 && std::in_range<std::int32_t>(code_);
+    return isStatus ? static_cast<std::int32_t>(code_) : other;
+}
+
 const Dictionary& Error::userInfo() const noexcept {
     static const Dictionary none;
     return userInfo_ == nullptr ? none : *userInfo_;

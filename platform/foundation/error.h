@@ -46,6 +46,10 @@ class Error {
     const std::string& domain() const noexcept { return domain_; }
     std::int64_t code() const noexcept { return code_; }
 
+    /// The platform status that it holds; `other` for another domain, and for a number that is no failing
+    /// status.
+    std::int32_t statusOr(std::int32_t other) const noexcept;
+
     /// One sentence for a person, naming the file where there is one.
     std::string localizedDescription() const;
 

@@ -23,16 +23,15 @@ trust::PolicyRef initialPolicy(const std::string& host) {
     return std::make_shared<const trust::Policy>(std::move(policy));
 }
 
-std::shared_ptr<trust::Trust> makeTrust(trust::TrustService& service, const std::string& host,
+std::shared_ptr<trust::Trust> makeTrust(const trust::TrustService& service, const std::string& host,
                                         const std::vector<Data>& list) {
     std::vector<trust::CertificateRef> certificates;
     for (const Data& der : list) {
-        certificates.push_back(service.createCertificate(der));
+        certificates.push_back(service.parseCertificate(der));
         if (!certificates.back()) return nullptr;
     }
-    std::shared_ptr<trust::Trust> trust;
-    const trust::Status status = service.createTrust(std::move(certificates), initialPolicy(host), trust);
-    return status == trust::kSuccess ? trust : nullptr;
+    const auto trust = service.makeTrust(std::move(certificates), initialPolicy(host));
+    return trust ? *trust : nullptr;
 }
 
 // Outlives the delegate's call, because a faulty delegate may keep the completion and call it later.

@@ -41,7 +41,7 @@ struct CertificateDescription {
     std::optional<foundation::Data> authorityKeyIdentifier;
 };
 
-/// `nullopt` unless `der` is exactly one certificate that TrustService::createCertificate would accept.
+/// `nullopt` unless `der` is exactly one certificate that TrustService::parseCertificate would accept.
 std::optional<CertificateDescription> describeCertificate(foundation::ByteView der);
 
 }  // namespace pinwell::trust

@@ -100,18 +100,15 @@ PolicyRef convertPolicy(const ostrel_policy& object) {
     return std::make_shared<const Policy>(std::move(policy));
 }
 
-NamedPolicyOutcome createNamedPolicy(const std::string& library, const std::string& constructorName,
-                                     PolicyRef& policy) {
-    policy = nullptr;
+std::optional<PolicyRef> namedPolicy(const std::string& library, const std::string& constructorName) {
     const LibraryHandle handle(dlopen(library.c_str(), RTLD_LAZY | RTLD_LOCAL));
-    if (!handle) return NamedPolicyOutcome::unavailable;
+    if (!handle) return std::nullopt;
     // POSIX promises that an object pointer from dlsym can hold a function's address.
     const auto constructor =
         reinterpret_cast<ostrel_policy_constructor>(dlsym(handle.get(), constructorName.c_str()));
-    if (constructor == nullptr) return NamedPolicyOutcome::unavailable;
+    if (constructor == nullptr) return std::nullopt;
     const PolicyHandle object(constructor());
-    if (object) policy = convertPolicy(*object);
-    return policy ? NamedPolicyOutcome::created : NamedPolicyOutcome::refused;
+    return object ? convertPolicy(*object) : nullptr;
 }
 
 }  // namespace pinwell::trust

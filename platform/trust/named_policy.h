@@ -2,6 +2,7 @@
 // include/pinwell/ostrel_security.h.
 #pragma once
 
+#include <optional>
 #include <string>
 
 #include "trust/trust.h"
@@ -11,10 +12,9 @@ struct ostrel_policy;
 namespace pinwell::trust {
 
 /// Opens the library by the dynamic loader's rules, calls the constructor of that name, and closes the
-/// library. `policy` is null unless the outcome is `created`. An unusable object counts as a refusal: a
-/// faulty library must not lead to the built-in policy.
-NamedPolicyOutcome createNamedPolicy(const std::string& library, const std::string& constructorName,
-                                     PolicyRef& policy);
+/// library. Results as in TrustService::namedPolicy. Null for an unusable object too: a faulty library must
+/// not lead to the built-in policy.
+std::optional<PolicyRef> namedPolicy(const std::string& library, const std::string& constructorName);
 
 /// A copy of the object's contents; null if it breaks the interface.
 PolicyRef convertPolicy(const ostrel_policy& object);

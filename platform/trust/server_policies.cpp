@@ -33,7 +33,7 @@ PolicyRef makePolicy(std::string_view oid, Dictionary options) {
 
 }  // namespace
 
-PolicyRef createPinnedServerPolicy(std::string_view host) {
+PolicyRef pinnedServerPolicy(std::string_view host) {
     if (host.empty()) return nullptr;
     Dictionary options = serverOptions(host);
     options.emplace(option::kPlatformAnchor, Dictionary{});
@@ -41,7 +41,7 @@ PolicyRef createPinnedServerPolicy(std::string_view host) {
     return makePolicy(kPinnedServerPolicyOid, std::move(options));
 }
 
-PolicyRef createCompatibilityServerPolicy(std::string_view host) {
+PolicyRef compatibilityServerPolicy(std::string_view host) {
     if (host.empty()) return nullptr;
     Dictionary options = serverOptions(host);
     options.emplace(option::kCompatibilityAnchor, Dictionary{});

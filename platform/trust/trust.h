@@ -27,6 +27,7 @@ using foundation::Data;
 using foundation::Date;
 using foundation::Dictionary;
 using foundation::Error;
+using foundation::Result;
 
 /// A platform status; 0 is success.
 using Status = std::int32_t;
@@ -110,62 +111,56 @@ using PolicyRef = std::shared_ptr<const Policy>;
 inline constexpr std::string_view kPinnedServerMarkerOid = "1.2.840.177245.100.6.27.2";
 
 /// The two TLS server policies, bound to a host; null for an empty host.
-PolicyRef createPinnedServerPolicy(std::string_view host);
-PolicyRef createCompatibilityServerPolicy(std::string_view host);
+PolicyRef pinnedServerPolicy(std::string_view host);
+PolicyRef compatibilityServerPolicy(std::string_view host);
 
 /// Keys of the property dictionaries.
 inline constexpr std::string_view kPropertyTitle = "title";
 inline constexpr std::string_view kPropertyError = "error";
 
-/// A certificate list under evaluation.
+/// A certificate list under evaluation. An error has the domain kOSStatusErrorDomain.
 class Trust {
   public:
     virtual ~Trust() = default;
 
     /// Replaces the policies by this one and drops an earlier verdict.
-    virtual Status setPolicy(PolicyRef policy) = 0;
+    virtual Result<void> setPolicy(PolicyRef policy) = 0;
 
-    /// Judges the list. A status other than success means that no judgement was possible.
-    virtual Status evaluate(Verdict& verdict) = 0;
+    /// Judges the list. An error means that no judgement was possible.
+    virtual Result<Verdict> evaluate() = 0;
 
     /// One dictionary for each certificate of the chain, leaf first: a title, and an error if it is faulty.
-    virtual Array copyProperties() const = 0;
+    virtual Array properties() const = 0;
 
     /// One line that names the failure and the faulty certificate; `nullopt` after success.
-    virtual std::optional<std::string> copyFailureDescription() const = 0;
+    virtual std::optional<std::string> failureDescription() const = 0;
 
     /// The key of the evaluated leaf; null if there is none.
-    virtual PublicKeyRef copyPublicKey() const = 0;
+    virtual PublicKeyRef publicKey() const = 0;
 };
 
-/// The result of looking up a policy by name in the policy library.
-enum class NamedPolicyOutcome {
-    unavailable,  // no library, or it does not know the name
-    refused,      // the constructor returned nothing
-    created,
-};
-
+/// An error has the domain kOSStatusErrorDomain.
 class TrustService {
   public:
     virtual ~TrustService() = default;
 
     /// Null if `der` is not exactly one well-formed certificate.
-    virtual CertificateRef createCertificate(ByteView der) = 0;
+    virtual CertificateRef parseCertificate(ByteView der) const = 0;
 
-    /// A policy from the platform security library's argument-less constructor of that name.
-    virtual NamedPolicyOutcome createNamedPolicy(const std::string& constructorName, PolicyRef& policy) = 0;
+    /// A policy from the platform security library's argument-less constructor of that name. `nullopt` if
+    /// there is no library, or it does not know the name; null if the constructor returns nothing.
+    virtual std::optional<PolicyRef> namedPolicy(const std::string& constructorName) const = 0;
 
     /// Leaf first. The certificates after the leaf are candidates for its chain, in any order; useless ones
     /// are skipped. Returns kParameterError for an empty list, one of more than 64, and certificates of
     /// another service.
-    virtual Status createTrust(std::vector<CertificateRef> certificates, PolicyRef policy,
-                               std::shared_ptr<Trust>& trust) = 0;
+    virtual Result<std::shared_ptr<Trust>> makeTrust(std::vector<CertificateRef> certificates,
+                                                     PolicyRef policy) const = 0;
 
-    /// The error is kSignatureError of the OS-status domain. ECDSA in X9.62 form over SHA-256 of `message`.
-    /// The signature is the DER element at the start of `signature`; all bytes after it must be zero. Returns
-    /// `nullopt` if it verifies.
-    virtual std::optional<Error> verifySignature(const PublicKey& key, ByteView message,
-                                                 ByteView signature) = 0;
+    /// Returns kSignatureError unless the signature verifies: ECDSA in X9.62 form over SHA-256 of `message`.
+    /// The signature is the DER element at the start of `signature`; all bytes after it must be zero.
+    virtual Result<void> verifySignature(const PublicKey& key, ByteView message,
+                                         ByteView signature) const = 0;
 };
 
 /// The service over the platform directory's anchors, read once on first need. `now` is the evaluation time.

@@ -109,31 +109,29 @@ class ChainTrust final : public Trust {
           certificates_(std::move(certificates)),
           policy_(std::move(policy)) {}
 
-    Status setPolicy(PolicyRef policy) override {
-        if (!policy) return kParameterError;
+    Result<void> setPolicy(PolicyRef policy) override {
+        if (!policy) return Error::osStatus(kParameterError);
         policy_ = std::move(policy);
         judgement_.reset();
         policyError_.reset();
-        return kSuccess;
+        return {};
     }
 
-    Status evaluate(Verdict& verdict) override {
+    Result<Verdict> evaluate() override {
         judgement_.reset();
         policyError_.reset();
-        const foundation::Result<Requirements> requirements = readRequirements(policy_->options);
+        const Result<Requirements> requirements = readRequirements(policy_->options);
         if (!requirements) {
             policyError_ = requirements.error().localizedFailureReason();
-            verdict = Verdict::otherError;
-            return kSuccess;
+            return Verdict::otherError;
         }
         judgement_ = judge(certificates_, *requirements, *environment_, checks_);
-        verdict = judgement_->verdict();
-        return kSuccess;
+        return judgement_->verdict();
     }
 
-    Array copyProperties() const override {
-        Array properties;
-        if (!judgement_) return properties;
+    Array properties() const override {
+        Array all;
+        if (!judgement_) return all;
         const CertificateList& chain = judgement_->chain.certificates;
         for (std::size_t i = 0; i < chain.size(); ++i) {
             Dictionary entry;
@@ -141,12 +139,12 @@ class ChainTrust final : public Trust {
             const auto failure = std::find_if(judgement_->failures.begin(), judgement_->failures.end(),
                                               [&](const Failure& one) { return one.certificate == i; });
             if (failure != judgement_->failures.end()) entry.emplace(kPropertyError, failure->reason);
-            properties.emplace_back(std::move(entry));
+            all.emplace_back(std::move(entry));
         }
-        return properties;
+        return all;
     }
 
-    std::optional<std::string> copyFailureDescription() const override {
+    std::optional<std::string> failureDescription() const override {
         if (policyError_) return foundation::format("Policy %@: %@", policy_->oid, *policyError_);
         if (!judgement_ || judgement_->failures.empty()) return std::nullopt;
         const Failure& failure = judgement_->failures.front();
@@ -155,7 +153,7 @@ class ChainTrust final : public Trust {
                                   failure.reason);
     }
 
-    PublicKeyRef copyPublicKey() const override {
+    PublicKeyRef publicKey() const override {
         return judgement_ ? judgement_->chain.certificates.front()->publicKey() : nullptr;
     }
 
@@ -195,39 +193,37 @@ class X509TrustService final : public TrustService {
     X509TrustService(std::shared_ptr<Environment> environment, std::string securityLibrary)
         : environment_(std::move(environment)), securityLibrary_(std::move(securityLibrary)) {}
 
-    CertificateRef createCertificate(ByteView der) override { return certificates_.parse(der); }
+    CertificateRef parseCertificate(ByteView der) const override { return certificates_.parse(der); }
 
-    NamedPolicyOutcome createNamedPolicy(const std::string& constructorName, PolicyRef& policy) override {
-        return trust::createNamedPolicy(securityLibrary_, constructorName, policy);
+    std::optional<PolicyRef> namedPolicy(const std::string& constructorName) const override {
+        return trust::namedPolicy(securityLibrary_, constructorName);
     }
 
-    Status createTrust(std::vector<CertificateRef> certificates, PolicyRef policy,
-                       std::shared_ptr<Trust>& trust) override {
-        trust = nullptr;
+    Result<std::shared_ptr<Trust>> makeTrust(std::vector<CertificateRef> certificates,
+                                             PolicyRef policy) const override {
         if (certificates.empty() || certificates.size() > kMaximumCertificates || !policy)
-            return kParameterError;
+            return Error::osStatus(kParameterError);
         CertificateList list;
         for (const CertificateRef& certificate : certificates) {
             X509CertificateRef ours = std::dynamic_pointer_cast<const X509Certificate>(certificate);
-            if (!ours) return kParameterError;
+            if (!ours) return Error::osStatus(kParameterError);
             list.push_back(std::move(ours));
         }
-        trust = std::make_shared<ChainTrust>(environment_, std::move(list), std::move(policy));
-        return kSuccess;
+        return std::shared_ptr<Trust>(
+            std::make_shared<ChainTrust>(environment_, std::move(list), std::move(policy)));
     }
 
-    std::optional<Error> verifySignature(const PublicKey& key, ByteView message,
-                                         ByteView signature) override {
+    Result<void> verifySignature(const PublicKey& key, ByteView message, ByteView signature) const override {
         const auto* const ours = dynamic_cast<const X509PublicKey*>(&key);
         if (ours == nullptr) return Error::osStatus(kParameterError);
-        if (verifyEcdsa(*ours, message, signature)) return std::nullopt;
+        if (verifyEcdsa(*ours, message, signature)) return {};
         return Error(foundation::kOSStatusErrorDomain, kSignatureError, "The signature does not verify.");
     }
 
   private:
     std::shared_ptr<Environment> environment_;
     std::string securityLibrary_;
-    RecentCertificates certificates_;
+    mutable RecentCertificates certificates_;
 };
 
 }  // namespace

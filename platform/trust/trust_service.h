@@ -9,7 +9,7 @@ namespace pinwell::trust {
 /// Maximum length of a trust object's list.
 inline constexpr std::size_t kMaximumCertificates = 64;
 
-/// The library of createNamedPolicy; found by the dynamic loader's ordinary rules.
+/// The library of namedPolicy; found by the dynamic loader's ordinary rules.
 inline constexpr const char* kSecurityLibrary = "libostrelsecurity.so.1";
 
 /// `loadAnchors` is called once, on first use, with any number of threads.

@@ -11,6 +11,7 @@ using foundation::Array;
 using foundation::Data;
 using foundation::Dictionary;
 using foundation::Error;
+using foundation::Result;
 using foundation::Value;
 
 namespace {
@@ -39,28 +40,29 @@ Dictionary dictionaryOf(const SigningInformation& information) {
     return dictionary;
 }
 
+Status statusOf(const Error& error) {
+    return error.statusOr(codesign::kInvalidSignature);
+}
+
 // Signs `code` in memory and attaches that signature to it.
-Status signDetached(codesign::CodeSigningService& service, codesign::StaticCode& code) {
+Result<void> signDetached(const codesign::CodeSigningService& service, codesign::StaticCode& code) {
     codesign::SignerParameters parameters;
     parameters.identifier = kIdentifier;
     parameters.detachedSignature = std::make_shared<Data>();
     parameters.digestAlgorithm = codesign::DigestType::sha256;
 
-    std::shared_ptr<codesign::Signer> signer;
-    Status status = service.createSigner(parameters, codesign::kSignOpaque, signer);
-    if (status != codesign::kSuccess) {
-        NoisyLog("Unable to create signer reference. %@", Error::osStatus(status));
-        return status;
+    const auto signer = service.makeSigner(parameters, codesign::kSignOpaque);
+    if (!signer) {
+        NoisyLog("Unable to create signer reference. %@", signer.error());
+        return signer.error();
     }
-    status = service.addSignature(*signer, code, 0);
-    if (status != codesign::kSuccess) {
-        NoisyLog("Unable to add signer to code reference. %@", Error::osStatus(status));
-        return status;
+    if (auto signing = service.addSignature(**signer, code, 0); !signing) {
+        NoisyLog("Unable to add signer to code reference. %@", signing.error());
+        return signing;
     }
-    status = service.setDetachedSignature(code, *parameters.detachedSignature, 0);
-    if (status != codesign::kSuccess)
-        NoisyLog("Unable to add detached signature to code reference. %@", Error::osStatus(status));
-    return status;
+    auto attachment = service.setDetachedSignature(code, *parameters.detachedSignature, 0);
+    if (!attachment) NoisyLog("Unable to add detached signature to code reference. %@", attachment.error());
+    return attachment;
 }
 
 }  // namespace
@@ -68,23 +70,23 @@ Status signDetached(codesign::CodeSigningService& service, codesign::StaticCode&
 Status syntheticCDHashForURL(const foundation::URL& fileURL, const Platform& platform,
                              std::uint32_t* digestAlgorithm, std::optional<Data>* cdHash) {
     if (digestAlgorithm == nullptr && cdHash == nullptr) return codesign::kParameterError;
-    codesign::CodeSigningService& service = platform.codeSigning;
+    const codesign::CodeSigningService& service = platform.codeSigning;
 
-    std::shared_ptr<codesign::StaticCode> code;
-    Status status = service.createStaticCode(fileURL, 0, code);
-    if (status != codesign::kSuccess || code == nullptr) {
-        NoisyLog("Unable to create for %@: %@", fileURL.lastPathComponent(), Error::osStatus(status));
-        return status;
+    const auto code = service.staticCode(fileURL, 0);
+    if (!code || *code == nullptr) {
+        const Error error = code ? Error::osStatus(codesign::kSuccess) : code.error();
+        NoisyLog("Unable to create for %@: %@", fileURL.lastPathComponent(), error);
+        return code ? codesign::kSuccess : statusOf(error);
     }
-    status = signDetached(service, *code);
-    if (status != codesign::kSuccess) return status;
+    if (const auto signing = signDetached(service, **code); !signing) return statusOf(signing.error());
 
-    std::optional<SigningInformation> information;
-    status = service.copySigningInformation(*code, codesign::kSigningInformation, information);
-    if (status != codesign::kSuccess || !information) {
-        NoisyLog("Could not get signing information. %@", Error::osStatus(status));
-        return status;
+    const auto found = service.signingInformation(**code, codesign::kSigningInformation);
+    if (!found || !*found) {
+        const Error error = found ? Error::osStatus(codesign::kSuccess) : found.error();
+        NoisyLog("Could not get signing information. %@", error);
+        return found ? codesign::kSuccess : statusOf(error);
     }
+    const std::optional<SigningInformation>& information = *found;
 
     const auto& algorithms = information->digestAlgorithms;
     if (algorithms.empty() || algorithms.size() != information->cdHashes.size()) {

@@ -1,5 +1,6 @@
 // Certificates of a ticket and of a server, each up to 131072 bytes, and the PEM files of distrust.
 #include <algorithm>
+#include <stdexcept>
 
 #include "costly_input.h"
 #include "support/certificate_builder.h"
@@ -29,13 +30,11 @@ void judge(const std::vector<ByteView>& list) {
     const auto service = trust::makeTrustService(
         foundation::PlatformDirectory("/nowhere"), [](std::string_view) {}, [] { return kJudgedAt; });
     std::vector<trust::CertificateRef> certificates;
-    for (const ByteView der : list) certificates.push_back(service->createCertificate(der));
-    std::shared_ptr<trust::Trust> object;
-    service->createTrust(certificates, trust::createPinnedServerPolicy(kServerHost), object);
-    auto verdict = trust::Verdict::invalid;
-    object->evaluate(verdict);
-    object->setPolicy(trust::createCompatibilityServerPolicy(kServerHost));
-    object->evaluate(verdict);
+    for (const ByteView der : list) certificates.push_back(service->parseCertificate(der));
+    const auto object = service->makeTrust(certificates, trust::pinnedServerPolicy(kServerHost));
+    if (!object || !(*object)->evaluate() ||
+        !(*object)->setPolicy(trust::compatibilityServerPolicy(kServerHost)) || !(*object)->evaluate())
+        throw std::runtime_error("the list could not be judged");
 }
 
 /// Certificates end to end: all are read, and the first of them judged.

@@ -34,9 +34,9 @@ trust::PolicyRef makePolicy(const ChainCase& one, trust::TrustService& service) 
             EXPECT_EQ(_satchel_create_cert_policy(&policy, service), satchel_status::kSuccess);
             break;
         case ChainPolicy::pinned:
-            return trust::createPinnedServerPolicy(one.host);
+            return trust::pinnedServerPolicy(one.host);
         case ChainPolicy::compatibility:
-            return trust::createCompatibilityServerPolicy(one.host);
+            return trust::compatibilityServerPolicy(one.host);
     }
     return policy;
 }
@@ -46,7 +46,7 @@ std::optional<std::vector<trust::CertificateRef>> parse(const std::vector<founda
                                                         trust::TrustService& service) {
     std::vector<trust::CertificateRef> certificates;
     for (const foundation::Data& der : list) {
-        certificates.push_back(service.createCertificate(der));
+        certificates.push_back(service.parseCertificate(der));
         if (certificates.back() == nullptr) return std::nullopt;
     }
     return certificates;
@@ -59,14 +59,16 @@ char judge(const ChainCase& one, std::string& reason) {
     const auto certificates = parse(scene.list, *service);
     if (!certificates) return 'x';
     const trust::PolicyRef policy = makePolicy(one, *service);
-    std::shared_ptr<trust::Trust> object;
-    const trust::Status status = service->createTrust(*certificates, policy, object);
-    if (status == trust::kParameterError) return 'p';
-    EXPECT_EQ(status, trust::kSuccess);
-    auto verdict = Verdict::invalid;
-    EXPECT_EQ(object->evaluate(verdict), trust::kSuccess);
-    reason = object->copyFailureDescription().value_or("no failure");
-    return static_cast<char>('0' + static_cast<int>(verdict));
+    const auto object = service->makeTrust(*certificates, policy);
+    if (!object) {
+        EXPECT_EQ(object.error().code(), trust::kParameterError);
+        return 'p';
+    }
+    const auto verdict = (*object)->evaluate();
+    EXPECT_TRUE(verdict);
+    if (!verdict) return 'e';
+    reason = (*object)->failureDescription().value_or("no failure");
+    return static_cast<char>('0' + static_cast<int>(*verdict));
 }
 
 /// Trust by the user alone is enough for a server, but not for a ticket.
@@ -145,15 +147,15 @@ std::vector<ServerCase> serverCases() {
 /// challenge.
 bool letsIn(const Scene& scene, trust::TrustService& service, const ChainCase& one) {
     const auto certificates = parse(scene.list, service);
-    std::shared_ptr<trust::Trust> object;
-    if (!certificates ||
-        service.createTrust(*certificates, makePolicy(one, service), object) != trust::kSuccess)
-        return false;
+    if (!certificates) return false;
+    const auto object = service.makeTrust(*certificates, makePolicy(one, service));
+    if (!object) return false;
     test::ControllerRun run;
     const test::MessageCapture output(kVerbosityNormal);
     const auto session = *run.platform.https.ephemeralSession(run.controller);
     std::optional<https::Disposition> given;
-    run.controller.didReceiveChallenge(*session, {one.host, https::AuthenticationMethod::serverTrust, object},
+    run.controller.didReceiveChallenge(*session,
+                                       {one.host, https::AuthenticationMethod::serverTrust, *object},
                                        [&](https::Disposition disposition,
                                            const std::optional<https::Credential>&) { given = disposition; });
     EXPECT_TRUE(given == https::Disposition::useCredential || given == https::Disposition::cancelChallenge);

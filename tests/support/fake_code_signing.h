@@ -1,11 +1,15 @@
 // A code-signing service with results set by the test.
 #pragma once
 
+#include <memory>
 #include <optional>
+#include <utility>
+#include <vector>
 
 #include "codesign/code_signing.h"
 #include "foundation/bytes.h"
 #include "foundation/url.h"
+#include "support/status.h"
 
 namespace pinwell::test {
 
@@ -14,58 +18,61 @@ class FakeCodeSigningService : public codesign::CodeSigningService {
     codesign::Status createStatus = codesign::kSuccess;
     bool handsOutCode = true;
     codesign::Status validity = codesign::kSuccess;
-    codesign::Status copyStatus = codesign::kSuccess;
+    codesign::Status informationStatus = codesign::kSuccess;
     std::optional<codesign::SigningInformation> information;
     codesign::Status signerStatus = codesign::kSuccess;
     codesign::Status addStatus = codesign::kSuccess;
     codesign::Status detachedStatus = codesign::kSuccess;
     std::optional<codesign::SigningInformation> detachedInformation;  // from when a signature is attached
-    std::optional<codesign::SignerParameters> signerParameters;
-    std::uint32_t signerFlags = 0;
-    std::uint32_t validityFlags = 0;
-    std::uint32_t informationSets = 0;
-    int createCalls = 0;
 
-    codesign::Status createStaticCode(const foundation::URL&, std::uint32_t,
-                                      std::shared_ptr<codesign::StaticCode>& code) override {
+    // Records.
+    mutable std::optional<codesign::SignerParameters> signerParameters;
+    mutable std::uint32_t signerFlags = 0;
+    mutable std::uint32_t validityFlags = 0;
+    mutable std::uint32_t informationSets = 0;
+    mutable int createCalls = 0;
+
+    foundation::Result<std::shared_ptr<codesign::StaticCode>> staticCode(const foundation::URL&,
+                                                                         std::uint32_t) const override {
         ++createCalls;
-        if (createStatus == codesign::kSuccess && handsOutCode) code = std::make_shared<Code>();
-        return createStatus;
+        return withStatus<std::shared_ptr<codesign::StaticCode>>(
+            createStatus, handsOutCode ? std::make_shared<Code>() : nullptr);
     }
-    codesign::Status checkValidity(codesign::StaticCode&, std::uint32_t flags) override {
+    foundation::Result<void> checkValidity(const codesign::StaticCode&, std::uint32_t flags) const override {
         validityFlags = flags;
-        return validity;
+        return withStatus(validity);
     }
-    codesign::Status copySigningInformation(codesign::StaticCode& code, std::uint32_t sets,
-                                            std::optional<codesign::SigningInformation>& out) override {
+    foundation::Result<std::optional<codesign::SigningInformation>> signingInformation(
+        const codesign::StaticCode& code, std::uint32_t sets) const override {
         informationSets = sets;
-        const bool isDetached = dynamic_cast<Code&>(code).isDetached;
-        if (copyStatus == codesign::kSuccess) out = isDetached ? detachedInformation : information;
-        return copyStatus;
+        const bool isDetached = dynamic_cast<const Code&>(code).isDetached;
+        return withStatus(informationStatus, isDetached ? detachedInformation : information);
     }
-    codesign::Status createSigner(const codesign::SignerParameters& parameters, std::uint32_t flags,
-                                  std::shared_ptr<codesign::Signer>& signer) override {
+    foundation::Result<std::shared_ptr<codesign::Signer>> makeSigner(
+        const codesign::SignerParameters& parameters, std::uint32_t flags) const override {
         signerParameters = parameters;
         signerFlags = flags;
-        if (signerStatus == codesign::kSuccess) signer = std::make_shared<Signer>();
-        return signerStatus;
+        return withStatus<std::shared_ptr<codesign::Signer>>(signerStatus, std::make_shared<Signer>());
     }
 
     /// The "signature" is one byte, which setDetachedSignature expects.
-    codesign::Status addSignature(codesign::Signer&, codesign::StaticCode&, std::uint32_t) override {
+    foundation::Result<void> addSignature(codesign::Signer&, const codesign::StaticCode&,
+                                          std::uint32_t) const override {
         if (addStatus == codesign::kSuccess) *signerParameters->detachedSignature = kSignature;
-        return addStatus;
+        return withStatus(addStatus);
     }
-    codesign::Status setDetachedSignature(codesign::StaticCode& code, const foundation::Data& detached,
-                                          std::uint32_t) override {
-        if (detached != kSignature) return codesign::kInvalidSignature;
+    foundation::Result<void> setDetachedSignature(codesign::StaticCode& code,
+                                                  const foundation::Data& detached,
+                                                  std::uint32_t) const override {
+        if (detached != kSignature) return withStatus(codesign::kInvalidSignature);
         if (detachedStatus == codesign::kSuccess) dynamic_cast<Code&>(code).isDetached = true;
-        return detachedStatus;
+        return withStatus(detachedStatus);
     }
-    codesign::Status copyAllCodeHashes(const foundation::URL&,
-                                       std::vector<codesign::SigningInformation>& all) override {
+    foundation::Result<std::vector<codesign::SigningInformation>> allCodeHashes(
+        const foundation::URL&) const override {
+        std::vector<codesign::SigningInformation> all;
         if (information) all.push_back(*information);
-        return copyStatus;
+        return withStatus(informationStatus, std::move(all));
     }
 
   private:

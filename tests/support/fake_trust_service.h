@@ -18,6 +18,7 @@
 #include <vector>
 
 #include "foundation/bytes.h"
+#include "support/status.h"
 #include "trust/trust.h"
 
 namespace pinwell::test {
@@ -54,73 +55,69 @@ class FakeTrustService : public trust::TrustService {
 
     // Results. Each call takes a list's next entry, and the last one stays; an empty list is success.
     std::function<bool(foundation::ByteView)> parsesCertificate = [](foundation::ByteView) { return true; };
-    trust::NamedPolicyOutcome namedPolicyOutcome = trust::NamedPolicyOutcome::unavailable;
-    trust::PolicyRef namedPolicy;
-    trust::Status createTrustStatus = trust::kSuccess;
-    bool createsTrustObject = true;
+    std::optional<trust::PolicyRef> libraryPolicy;  // of namedPolicy
+    trust::Status makeTrustStatus = trust::kSuccess;
+    bool makesTrustObject = true;
     std::vector<trust::Status> setPolicyStatuses;
     std::vector<Evaluation> evaluations;
     trust::PublicKeyRef publicKey = std::make_shared<FakePublicKey>();
     std::optional<trust::Error> signatureError;
 
     // Records, in the order of the calls.
-    std::vector<foundation::Data> parsedCertificates;
-    std::vector<std::string> namedPolicyRequests;
-    std::vector<std::vector<foundation::Data>> certificateLists;  // of createTrust
-    std::vector<trust::PolicyRef> policies;                       // of createTrust and setPolicy
-    std::size_t evaluationCount = 0;
-    std::vector<SignatureCheck> signatureChecks;
+    mutable std::vector<foundation::Data> parsedCertificates;
+    mutable std::vector<std::string> namedPolicyRequests;
+    mutable std::vector<std::vector<foundation::Data>> certificateLists;  // of makeTrust
+    mutable std::vector<trust::PolicyRef> policies;                       // of makeTrust and setPolicy
+    mutable std::size_t evaluationCount = 0;
+    mutable std::vector<SignatureCheck> signatureChecks;
 
-    trust::CertificateRef createCertificate(foundation::ByteView der) override {
+    trust::CertificateRef parseCertificate(foundation::ByteView der) const override {
         parsedCertificates.push_back(foundation::toData(der));
         return parsesCertificate(der) ? std::make_shared<FakeCertificate>(der) : nullptr;
     }
 
-    trust::NamedPolicyOutcome createNamedPolicy(const std::string& constructorName,
-                                                trust::PolicyRef& policy) override {
+    std::optional<trust::PolicyRef> namedPolicy(const std::string& constructorName) const override {
         namedPolicyRequests.push_back(constructorName);
-        policy = namedPolicyOutcome == trust::NamedPolicyOutcome::created ? namedPolicy : nullptr;
-        return namedPolicyOutcome;
+        return libraryPolicy;
     }
 
-    trust::Status createTrust(std::vector<trust::CertificateRef> certificates, trust::PolicyRef policy,
-                              std::shared_ptr<trust::Trust>& trust) override {
+    foundation::Result<std::shared_ptr<trust::Trust>> makeTrust(
+        std::vector<trust::CertificateRef> certificates, trust::PolicyRef policy) const override {
         auto& list = certificateLists.emplace_back();
         for (const auto& certificate : certificates) list.push_back(certificate->der());
         policies.push_back(std::move(policy));
-        trust = createTrustStatus == trust::kSuccess && createsTrustObject ? makeTrust() : nullptr;
-        return createTrustStatus;
+        return withStatus(makeTrustStatus, makesTrustObject ? trustOfChallenge() : nullptr);
     }
 
-    std::optional<trust::Error> verifySignature(const trust::PublicKey&, foundation::ByteView message,
-                                                foundation::ByteView signature) override {
+    foundation::Result<void> verifySignature(const trust::PublicKey&, foundation::ByteView message,
+                                             foundation::ByteView signature) const override {
         signatureChecks.push_back({foundation::toData(message), foundation::toData(signature)});
-        return signatureError;
+        if (signatureError) return *signatureError;
+        return {};
     }
 
-    /// A trust object like one in an HTTPS challenge: not made by createTrust.
-    std::shared_ptr<trust::Trust> makeTrust() { return std::make_shared<FakeTrust>(*this); }
+    /// A trust object like one in an HTTPS challenge: not made by makeTrust.
+    std::shared_ptr<trust::Trust> trustOfChallenge() const { return std::make_shared<FakeTrust>(*this); }
 
   private:
     class FakeTrust : public trust::Trust {
       public:
-        explicit FakeTrust(FakeTrustService& service) : service_(service) {}
+        explicit FakeTrust(const FakeTrustService& service) : service_(service) {}
 
-        trust::Status setPolicy(trust::PolicyRef policy) override {
+        foundation::Result<void> setPolicy(trust::PolicyRef policy) override {
             service_.policies.push_back(std::move(policy));
             last_.reset();
-            return pick(service_.setPolicyStatuses, service_.setPolicyCount_++);
+            return withStatus(pick(service_.setPolicyStatuses, service_.setPolicyCount_++));
         }
-        trust::Status evaluate(trust::Verdict& verdict) override {
+        foundation::Result<trust::Verdict> evaluate() override {
             last_ = pick(service_.evaluations, service_.evaluationCount++);
-            if (last_->status == trust::kSuccess) verdict = last_->verdict;
-            return last_->status;
+            return withStatus(last_->status, last_->verdict);
         }
-        trust::Array copyProperties() const override { return last_ ? last_->properties : trust::Array{}; }
-        std::optional<std::string> copyFailureDescription() const override {
+        trust::Array properties() const override { return last_ ? last_->properties : trust::Array{}; }
+        std::optional<std::string> failureDescription() const override {
             return last_ ? last_->failureDescription : std::nullopt;
         }
-        trust::PublicKeyRef copyPublicKey() const override { return last_ ? service_.publicKey : nullptr; }
+        trust::PublicKeyRef publicKey() const override { return last_ ? service_.publicKey : nullptr; }
 
       private:
         template <class T>
@@ -128,11 +125,11 @@ class FakeTrustService : public trust::TrustService {
             return answers.empty() ? T{} : answers[std::min(index, answers.size() - 1)];
         }
 
-        FakeTrustService& service_;
+        const FakeTrustService& service_;
         std::optional<Evaluation> last_;
     };
 
-    std::size_t setPolicyCount_ = 0;
+    mutable std::size_t setPolicyCount_ = 0;
 };
 
 }  // namespace pinwell::test

@@ -49,24 +49,23 @@ class HashByExecutable : public FakeCodeSigningService {
     /// The text of an executable that makes a query for its hash raise an exception.
     static constexpr const char* kRaises = "raises..............";
 
-    codesign::Status createStaticCode(const foundation::URL& url, std::uint32_t,
-                                      std::shared_ptr<codesign::StaticCode>& code) override {
-        auto made = std::make_shared<Code>();
-        made->path = url.path();
-        code = std::move(made);
-        return codesign::kSuccess;
+    foundation::Result<std::shared_ptr<codesign::StaticCode>> staticCode(const foundation::URL& url,
+                                                                         std::uint32_t) const override {
+        auto code = std::make_shared<Code>();
+        code->path = url.path();
+        return std::shared_ptr<codesign::StaticCode>(std::move(code));
     }
-    codesign::Status checkValidity(codesign::StaticCode&, std::uint32_t) override {
-        return codesign::kSuccess;
+    foundation::Result<void> checkValidity(const codesign::StaticCode&, std::uint32_t) const override {
+        return {};
     }
-    codesign::Status copySigningInformation(codesign::StaticCode& code, std::uint32_t,
-                                            std::optional<codesign::SigningInformation>& out) override {
-        const std::string hash = readFile(dynamic_cast<Code&>(code).path + "/Contents/MacOS/App");
+    foundation::Result<std::optional<codesign::SigningInformation>> signingInformation(
+        const codesign::StaticCode& code, std::uint32_t) const override {
+        const std::string hash = readFile(dynamic_cast<const Code&>(code).path + "/Contents/MacOS/App");
         if (hash == kRaises) throw std::runtime_error("nobody has thought of this");
-        out.emplace();
-        out->unique = foundation::toData(hash);
-        out->digestAlgorithm = 2;
-        return codesign::kSuccess;
+        std::optional<codesign::SigningInformation> information(std::in_place);
+        information->unique = foundation::toData(hash);
+        information->digestAlgorithm = 2;
+        return information;
     }
 
   private:

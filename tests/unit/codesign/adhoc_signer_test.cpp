@@ -131,21 +131,16 @@ class AdHocSigning : public CodeSigningTest {
     /// it.
     codesign::SigningInformation sign(const Data& contents) {
         writeFile(scratch / "image", contents);
-        std::shared_ptr<codesign::StaticCode> code;
-        EXPECT_EQ(service.createStaticCode(scratch.url("image"), 0, code), kSuccess);
+        const std::shared_ptr<codesign::StaticCode> code = codeAt("image");
         codesign::SignerParameters parameters;
         parameters.identifier = "ADHOC";
         parameters.detachedSignature = std::make_shared<Data>();
-        std::shared_ptr<codesign::Signer> signer;
-        EXPECT_EQ(service.createSigner(parameters, codesign::kSignOpaque, signer), kSuccess);
-        EXPECT_EQ(service.addSignature(*signer, *code, 0), kSuccess);
-        EXPECT_EQ(service.setDetachedSignature(*code, *parameters.detachedSignature, 0), kSuccess);
-        EXPECT_EQ(service.checkValidity(*code, kValidityFlags), kSuccess);
-        std::optional<codesign::SigningInformation> information;
-        EXPECT_EQ(service.copySigningInformation(*code, codesign::kSigningInformation, information),
-                  kSuccess);
+        const auto signer = service.makeSigner(parameters, codesign::kSignOpaque).asOptional().value();
+        EXPECT_EQ(statusOf(service.addSignature(*signer, *code, 0)), kSuccess);
+        EXPECT_EQ(statusOf(service.setDetachedSignature(*code, *parameters.detachedSignature, 0)), kSuccess);
+        EXPECT_EQ(statusOf(service.checkValidity(*code, kValidityFlags)), kSuccess);
         EXPECT_EQ(readFile(scratch / "image"), foundation::toString(contents));
-        return information.value_or(codesign::SigningInformation());
+        return informationOf(*code, codesign::kSigningInformation);
     }
 };
 
@@ -205,32 +200,29 @@ TEST_F(AdHocSigning, GivesOtherBytesAnotherHash) {
 }
 
 TEST_F(AdHocSigning, NeedsItsParameters) {
-    std::shared_ptr<codesign::Signer> signer;
     const codesign::SignerParameters good = {"ADHOC", std::make_shared<Data>(), codesign::DigestType::sha256};
     codesign::SignerParameters parameters = good;
-    EXPECT_EQ(service.createSigner(parameters, 0, signer), codesign::kUnimplemented);
+    EXPECT_EQ(statusOf(service.makeSigner(parameters, 0)), codesign::kUnimplemented);
     parameters.digestAlgorithm = codesign::DigestType::sha1;
-    EXPECT_EQ(service.createSigner(parameters, codesign::kSignOpaque, signer), codesign::kUnimplemented);
+    EXPECT_EQ(statusOf(service.makeSigner(parameters, codesign::kSignOpaque)), codesign::kUnimplemented);
     parameters = good;
     parameters.identifier = "";
-    EXPECT_EQ(service.createSigner(parameters, codesign::kSignOpaque, signer), codesign::kParameterError);
+    EXPECT_EQ(statusOf(service.makeSigner(parameters, codesign::kSignOpaque)), codesign::kParameterError);
     parameters.identifier = std::string("AD\0HOC", 6);
-    EXPECT_EQ(service.createSigner(parameters, codesign::kSignOpaque, signer), codesign::kParameterError);
+    EXPECT_EQ(statusOf(service.makeSigner(parameters, codesign::kSignOpaque)), codesign::kParameterError);
     parameters = good;
     parameters.detachedSignature = nullptr;
-    EXPECT_EQ(service.createSigner(parameters, codesign::kSignOpaque, signer), codesign::kParameterError);
-    EXPECT_EQ(signer, nullptr);
+    EXPECT_EQ(statusOf(service.makeSigner(parameters, codesign::kSignOpaque)), codesign::kParameterError);
 }
 
 TEST_F(AdHocSigning, RefusesADetachedSignatureThatIsNone) {
     writeFile(scratch / "image", "some bytes");
-    std::shared_ptr<codesign::StaticCode> code;
-    ASSERT_EQ(service.createStaticCode(scratch.url("image"), 0, code), kSuccess);
-    EXPECT_EQ(service.setDetachedSignature(*code, {}, 0), codesign::kInvalidSignature);
-    EXPECT_EQ(service.setDetachedSignature(*code, Data(100), 0), codesign::kInvalidSignature);
-    EXPECT_EQ(service.setDetachedSignature(*code, SuperBlobBuilder().build(), 0),
+    const std::shared_ptr<codesign::StaticCode> code = codeAt("image");
+    EXPECT_EQ(statusOf(service.setDetachedSignature(*code, {}, 0)), codesign::kInvalidSignature);
+    EXPECT_EQ(statusOf(service.setDetachedSignature(*code, Data(100), 0)), codesign::kInvalidSignature);
+    EXPECT_EQ(statusOf(service.setDetachedSignature(*code, SuperBlobBuilder().build(), 0)),
               codesign::kInvalidSignature);
-    EXPECT_EQ(service.checkValidity(*code, kValidityFlags), codesign::kUnsigned);
+    EXPECT_EQ(statusOf(service.checkValidity(*code, kValidityFlags)), codesign::kUnsigned);
 }
 
 }  // namespace

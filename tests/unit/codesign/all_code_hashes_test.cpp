@@ -19,10 +19,11 @@ class AllCodeHashes : public CodeSigningTest {
   protected:
     /// The identifiers found, in order.
     std::vector<std::string> identifiersAt(const std::string& path, codesign::Status expected = kSuccess) {
-        std::vector<codesign::SigningInformation> all;
-        EXPECT_EQ(service.copyAllCodeHashes(foundation::URL::fileURLWithPath(path), all), expected);
+        const auto all = service.allCodeHashes(foundation::URL::fileURLWithPath(path));
+        EXPECT_EQ(statusOf(all), expected);
         std::vector<std::string> identifiers;
-        for (const auto& information : all) identifiers.push_back(information.identifier.value_or("none"));
+        if (!all) return identifiers;
+        for (const auto& information : *all) identifiers.push_back(information.identifier.value_or("none"));
         return identifiers;
     }
 
@@ -46,8 +47,8 @@ TEST_F(AllCodeHashes, AreThoseOfAllDirectoriesOfAllSignedSlices) {
                                     .slice(kSampleX86, plain)
                                     .slice(kSampleArm, two)
                                     .build());
-    std::vector<codesign::SigningInformation> all;
-    ASSERT_EQ(service.copyAllCodeHashes(scratch.url("tool"), all), kSuccess);
+    const std::vector<codesign::SigningInformation> all =
+        service.allCodeHashes(scratch.url("tool")).asOptional().value();
     ASSERT_EQ(all.size(), 2U);
     EXPECT_EQ(all[0].cdHashes, std::vector<Data>{codeHashOf(2, codeDirectoryNamed("seven"))});
     EXPECT_EQ(all[1].cdHashes, (std::vector<Data>{codeHashOf(2, sha256), codeHashOf(1, sha1)}));

@@ -12,6 +12,7 @@
 #include "foundation/bytes.h"
 #include "foundation/url.h"
 #include "support/executable_image_builder.h"
+#include "support/status.h"
 #include "support/temporary_directory.h"
 
 namespace pinwell::test {
@@ -47,14 +48,22 @@ class CodeSigningTest : public ::testing::Test {
 
     Answer ask(const std::string& path) {
         Answer answer;
-        std::shared_ptr<codesign::StaticCode> code;
-        answer.created = service.createStaticCode(foundation::URL::fileURLWithPath(path), 0, code);
+        const auto code = service.staticCode(foundation::URL::fileURLWithPath(path), 0);
+        answer.created = statusOf(code);
         if (!code) return answer;
-        answer.validity = service.checkValidity(*code, kValidityFlags);
-        std::optional<codesign::SigningInformation> information;
-        answer.copied = service.copySigningInformation(*code, kAllSets, information);
-        if (information) answer.information = *information;
+        answer.validity = statusOf(service.checkValidity(**code, kValidityFlags));
+        const auto information = service.signingInformation(**code, kAllSets);
+        answer.copied = statusOf(information);
+        if (information) answer.information = information->value();
         return answer;
+    }
+
+    std::shared_ptr<codesign::StaticCode> codeAt(const std::string& name) {
+        return service.staticCode(scratch.url(name), 0).asOptional().value();
+    }
+
+    codesign::SigningInformation informationOf(const codesign::StaticCode& code, std::uint32_t sets) {
+        return service.signingInformation(code, sets).asOptional().value().value();
     }
 
     Answer askAbout(const Data& contents) {

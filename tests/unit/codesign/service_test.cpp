@@ -86,9 +86,7 @@ TEST_F(StaticCodeOfAPath, IsNothingInADirectoryWithoutMainExecutable) {
     EXPECT_EQ(ask(scratch / "Sample.app").created, kStaticCodeNotFound);
     codesign::FileCodeSigningService blind(
         {std::make_shared<foundation::Places>(), [](auto&, const std::string&) { return std::nullopt; }});
-    std::shared_ptr<codesign::StaticCode> code;
-    EXPECT_EQ(blind.createStaticCode(scratch.url("Sample.app"), 0, code), kStaticCodeNotFound);
-    EXPECT_EQ(code, nullptr);
+    EXPECT_EQ(statusOf(blind.staticCode(scratch.url("Sample.app"), 0)), kStaticCodeNotFound);
 }
 
 TEST_F(StaticCodeOfAPath, DoesNotFollowALink) {
@@ -117,57 +115,47 @@ TEST_F(StaticCodeOfAPath, EndsCleanlyWhereverTheFileIsCut) {
 
 TEST_F(StaticCodeOfAPath, FailsCleanlyWhenTheFileShrinksUnderIt) {
     writeFile(scratch / "image", imageNamed("a"));
-    std::shared_ptr<codesign::StaticCode> code;
-    ASSERT_EQ(service.createStaticCode(scratch.url("image"), 0, code), kSuccess);
+    const std::shared_ptr<codesign::StaticCode> code = codeAt("image");
     ASSERT_EQ(truncate((scratch / "image").c_str(), 100), 0);
-    EXPECT_EQ(service.checkValidity(*code, kValidityFlags), codesign::kIOError);
+    EXPECT_EQ(statusOf(service.checkValidity(*code, kValidityFlags)), codesign::kIOError);
 }
 
 TEST_F(StaticCodeOfAPath, IsAboutTheFileThatWasFound) {
     writeFile(scratch / "image", imageNamed("old"));
-    std::shared_ptr<codesign::StaticCode> code;
-    ASSERT_EQ(service.createStaticCode(scratch.url("image"), 0, code), kSuccess);
+    const std::shared_ptr<codesign::StaticCode> code = codeAt("image");
     writeFile(scratch / "other", imageNamed("new"));
     std::filesystem::rename(scratch / "other", scratch / "image");
-    std::optional<codesign::SigningInformation> information;
-    ASSERT_EQ(service.copySigningInformation(*code, kAllSets, information), kSuccess);
-    EXPECT_EQ(information->identifier, "old");
+    EXPECT_EQ(informationOf(*code, kAllSets).identifier, "old");
 }
 
 TEST_F(StaticCodeOfAPath, NeedsGoodParameters) {
     writeFile(scratch / "image", imageNamed("a"));
-    std::shared_ptr<codesign::StaticCode> code;
-    EXPECT_EQ(service.createStaticCode(scratch.url("image"), 1, code), kParameterError);
-    EXPECT_EQ(service.createStaticCode(*foundation::URL::fromString("https://a.example/b"), 0, code),
+    EXPECT_EQ(statusOf(service.staticCode(scratch.url("image"), 1)), kParameterError);
+    EXPECT_EQ(statusOf(service.staticCode(*foundation::URL::fromString("https://a.example/b"), 0)),
               kParameterError);
-    EXPECT_EQ(service.createStaticCode(foundation::URL::fileURLWithPath(""), 0, code), kParameterError);
-    EXPECT_EQ(code, nullptr);
-    ASSERT_EQ(service.createStaticCode(scratch.url("image"), 0, code), kSuccess);
-    EXPECT_EQ(service.checkValidity(*code, codesign::kDoNotValidateExecutable), kUnimplemented);
-    EXPECT_EQ(service.checkValidity(*code, 0), kUnimplemented);
+    EXPECT_EQ(statusOf(service.staticCode(foundation::URL::fileURLWithPath(""), 0)), kParameterError);
+    const std::shared_ptr<codesign::StaticCode> code = codeAt("image");
+    EXPECT_EQ(statusOf(service.checkValidity(*code, codesign::kDoNotValidateExecutable)), kUnimplemented);
+    EXPECT_EQ(statusOf(service.checkValidity(*code, 0)), kUnimplemented);
 }
 
 TEST_F(StaticCodeOfAPath, MustBeOfTheSameService) {
     struct Foreign : codesign::StaticCode {};
     Foreign foreign;
-    std::optional<codesign::SigningInformation> information;
-    EXPECT_EQ(service.checkValidity(foreign, kValidityFlags), kParameterError);
-    EXPECT_EQ(service.copySigningInformation(foreign, kAllSets, information), kParameterError);
-    EXPECT_EQ(service.setDetachedSignature(foreign, {}, 0), kParameterError);
+    EXPECT_EQ(statusOf(service.checkValidity(foreign, kValidityFlags)), kParameterError);
+    EXPECT_EQ(statusOf(service.signingInformation(foreign, kAllSets)), kParameterError);
+    EXPECT_EQ(statusOf(service.setDetachedSignature(foreign, {}, 0)), kParameterError);
 }
 
 TEST_F(StaticCodeOfAPath, LeavesTheTeamToTheSigningSet) {
     const Data codeDirectory = CodeDirectoryBuilder().team("TEAM123456").build();
     writeFile(scratch / "image",
               ExecutableImageBuilder().signature(SuperBlobBuilder::adHoc(codeDirectory).build()).build());
-    std::shared_ptr<codesign::StaticCode> code;
-    ASSERT_EQ(service.createStaticCode(scratch.url("image"), 0, code), kSuccess);
-    std::optional<codesign::SigningInformation> information;
-    ASSERT_EQ(service.copySigningInformation(*code, codesign::kSigningInformation, information), kSuccess);
-    EXPECT_EQ(information->teamIdentifier, "TEAM123456");
-    ASSERT_EQ(service.copySigningInformation(*code, codesign::kInternalInformation, information), kSuccess);
-    EXPECT_EQ(information->teamIdentifier, std::nullopt);
-    EXPECT_EQ(information->unique, codeHashOf(2, codeDirectory));
+    const std::shared_ptr<codesign::StaticCode> code = codeAt("image");
+    EXPECT_EQ(informationOf(*code, codesign::kSigningInformation).teamIdentifier, "TEAM123456");
+    const codesign::SigningInformation internal = informationOf(*code, codesign::kInternalInformation);
+    EXPECT_EQ(internal.teamIdentifier, std::nullopt);
+    EXPECT_EQ(internal.unique, codeHashOf(2, codeDirectory));
 }
 
 class SeparateSignature : public CodeSigningTest {

@@ -28,6 +28,13 @@ TEST(Error, OfAnUnknownNumberStillHasAText) {
     EXPECT_EQ(Error::osStatus(kParameterError).localizedFailureReason(), "A parameter was not valid.");
 }
 
+TEST(Error, GivesItsStatusOnlyIfItHoldsOne) {
+    EXPECT_EQ(Error::osStatus(-67061).statusOr(1), -67061);
+    EXPECT_EQ(Error::posix(ENOENT).statusOr(1), 1);
+    EXPECT_EQ(Error(kOSStatusErrorDomain, 0, "success").statusOr(1), 1);
+    EXPECT_EQ(Error(kOSStatusErrorDomain, std::int64_t{1} << 32, "zero if truncated").statusOr(1), 1);
+}
+
 TEST(Error, TakesFurtherUserInformation) {
     const Error error = Error("D", 1, "t").with("k", 1).with("k", 2);
     ASSERT_EQ(error.userInfo().size(), 1U);

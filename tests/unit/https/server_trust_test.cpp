@@ -69,7 +69,7 @@ TEST_F(ServerTrustChallenge, RefusesWithoutACredential) {
 
 TEST_F(ServerTrustChallenge, RefusesACredentialForAnotherTrustObject) {
     delegate.onChallenge = [this](auto&, auto& completion) {
-        completion(Disposition::useCredential, https::Credential{trust.makeTrust()});
+        completion(Disposition::useCredential, https::Credential{trust.trustOfChallenge()});
     };
     expectRefused(fetch(server.url()));
 }
@@ -105,7 +105,7 @@ TEST_F(ServerTrustChallenge, RefusesCertificatesThatTheTrustServiceCannotRead) {
 }
 
 TEST_F(ServerTrustChallenge, RefusesWhenNoTrustObjectCanBeMade) {
-    trust.createTrustStatus = trust::kParameterError;
+    trust.makeTrustStatus = trust::kParameterError;
     expectFailure(fetch(server.url()), URLErrorCode::secureConnectionFailed, "could not be read");
     EXPECT_THAT(delegate.events, ElementsAre("completion"));
 }

@@ -95,7 +95,7 @@ TEST_F(BasicCodeProperties, AreEmptyAndLoggedWhenSuccessComesWithoutACodeReferen
 }
 
 TEST_F(BasicCodeProperties, AreEmptyAndLoggedWhenTheInformationCannotBeCopied) {
-    platform.codeSigning.copyStatus = -67030;
+    platform.codeSigning.informationStatus = -67030;
     EXPECT_EQ(properties(), Value(Dictionary{}));
     ASSERT_EQ(platform.systemLog.entries().size(), 1U);
     EXPECT_EQ(platform.systemLog.entries()[0], "Unable to copy signing information (-67030)");
@@ -109,7 +109,7 @@ TEST_F(BasicCodeProperties, AreEmptyAndLoggedWhenNoInformationComesBack) {
 }
 
 TEST_F(BasicCodeProperties, LogTheSameHoweverLoudTheRunIs) {
-    platform.codeSigning.copyStatus = -67030;
+    platform.codeSigning.informationStatus = -67030;
     for (const std::uint8_t verbosity : {kVerbosityQuiet, kVerbosityNormal, kVerbosityVerbose}) {
         const std::size_t before = platform.systemLog.entries().size();
         const test::MessageCapture output(verbosity);

@@ -45,7 +45,7 @@ TEST_F(HashesOfAnArtefact, AreThoseOfAllItsCode) {
 }
 
 TEST_F(HashesOfAnArtefact, AreItsOwnAloneIfItsCodeCannotBeWalked) {
-    codeSigning.copyStatus = codesign::kUnimplemented;
+    codeSigning.informationStatus = codesign::kUnimplemented;
     EXPECT_EQ(hashes(), (std::vector<CodeHash>{hashOf(2, 1)}));
 }
 

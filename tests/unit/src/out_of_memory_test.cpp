@@ -98,9 +98,9 @@ TEST(OutOfMemory, LeavesAnOptionAsItWas) {
 TEST(OutOfMemory, MakesNoPolicy) {
     class WithoutNamedPolicy : public test::FakeTrustService {
       public:
-        trust::NamedPolicyOutcome createNamedPolicy(const std::string&, trust::PolicyRef&) override {
+        std::optional<trust::PolicyRef> namedPolicy(const std::string&) const override {
             failingSize = 0;  // the constructor's name is one more allocation, which is not under test
-            return trust::NamedPolicyOutcome::unavailable;
+            return std::nullopt;
         }
     } service;
     trust::PolicyRef policy;

@@ -12,33 +12,28 @@ using foundation::Array;
 using foundation::Dictionary;
 using foundation::Value;
 using test::FakeTrustService;
-using trust::NamedPolicyOutcome;
 
 TEST(TicketPolicy, IsThePlatformSecurityLibrarysWhenThatHasOne) {
     FakeTrustService service;
-    service.namedPolicyOutcome = NamedPolicyOutcome::created;
-    service.namedPolicy = std::make_shared<trust::Policy>(trust::Policy{"1.2.3", "theirs", {}});
+    service.libraryPolicy = std::make_shared<trust::Policy>(trust::Policy{"1.2.3", "theirs", {}});
     trust::PolicyRef policy;
     EXPECT_EQ(_satchel_create_cert_policy(&policy, service), status::kSuccess);
-    EXPECT_EQ(policy, service.namedPolicy);
+    EXPECT_EQ(policy, service.libraryPolicy);
     EXPECT_EQ(service.namedPolicyRequests,
               std::vector<std::string>{"SecPolicyCreateOstrelQuillonPlusTicket"});
 }
 
 TEST(TicketPolicy, IsNothingWhenTheNamedConstructorReturnsNothing) {
-    for (const NamedPolicyOutcome outcome : {NamedPolicyOutcome::refused, NamedPolicyOutcome::created}) {
-        FakeTrustService service;
-        service.namedPolicyOutcome = outcome;
-        service.namedPolicy = nullptr;
-        trust::PolicyRef policy = std::make_shared<trust::Policy>();
-        EXPECT_EQ(_satchel_create_cert_policy(&policy, service), status::kNoPolicy);
-        EXPECT_EQ(policy, nullptr);
-    }
+    FakeTrustService service;
+    service.libraryPolicy = trust::PolicyRef();
+    trust::PolicyRef policy = std::make_shared<trust::Policy>();
+    EXPECT_EQ(_satchel_create_cert_policy(&policy, service), status::kNoPolicy);
+    EXPECT_EQ(policy, nullptr);
 }
 
 TEST(TicketPolicy, HasExactlyTheseOptionsWhenItIsMadeHere) {
     FakeTrustService service;
-    service.namedPolicyOutcome = NamedPolicyOutcome::unavailable;
+    service.libraryPolicy = std::nullopt;
     trust::PolicyRef policy;
     ASSERT_EQ(_satchel_create_cert_policy(&policy, service), status::kSuccess);
     ASSERT_NE(policy, nullptr);

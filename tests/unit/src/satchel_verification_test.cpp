@@ -212,14 +212,13 @@ TEST_F(SatchelVerification, LooksForNoPolicyBeforeTheCertificatesAreRead) {
 // The policy (satchel_policy_test.cpp has its contents).
 
 TEST_F(SatchelVerification, EvaluatesUnderTheNamedPolicy) {
-    service.namedPolicyOutcome = trust::NamedPolicyOutcome::created;
-    service.namedPolicy = std::make_shared<trust::Policy>();
+    service.libraryPolicy = std::make_shared<trust::Policy>();
     EXPECT_EQ(verify(satchel()), status::kSuccess);
-    EXPECT_THAT(service.policies, ElementsAre(service.namedPolicy));
+    EXPECT_THAT(service.policies, ElementsAre(*service.libraryPolicy));
 }
 
 TEST_F(SatchelVerification, RefusesWhenTheNamedConstructorReturnsNothing) {
-    service.namedPolicyOutcome = trust::NamedPolicyOutcome::refused;
+    service.libraryPolicy = trust::PolicyRef();
     EXPECT_EQ(verify(satchel()), status::kNoPolicy);
     EXPECT_THAT(service.policies, IsEmpty());
 }
@@ -227,12 +226,12 @@ TEST_F(SatchelVerification, RefusesWhenTheNamedConstructorReturnsNothing) {
 // The trust object and its verdict.
 
 TEST_F(SatchelVerification, PassesOnAStatusOfTrustCreation) {
-    service.createTrustStatus = kForeignStatus;
+    service.makeTrustStatus = kForeignStatus;
     EXPECT_EQ(verify(satchel()), kForeignStatus);
 }
 
 TEST_F(SatchelVerification, RefusesTrustCreationThatSucceedsWithoutAnObject) {
-    service.createsTrustObject = false;
+    service.makesTrustObject = false;
     EXPECT_EQ(verify(satchel()), status::kNotAvailable);
 }
 
@@ -296,7 +295,7 @@ TEST_F(SatchelVerification, NeedsAPlaceForEveryResult) {
 
 TEST_F(SatchelVerification, HandsOutNothingThatItRefuses) {
     service.evaluations = {{.verdict = Verdict::proceed}};
-    std::shared_ptr<trust::Trust> evaluated = service.makeTrust();
+    std::shared_ptr<trust::Trust> evaluated = service.trustOfChallenge();
     EXPECT_EQ(_satchel_create_trust({}, nullptr, &evaluated, service), status::kNotTrusted);
     EXPECT_EQ(evaluated, nullptr);
 
@@ -308,7 +307,7 @@ TEST_F(SatchelVerification, HandsOutNothingThatItRefuses) {
 
 class ExhaustedTrustService : public FakeTrustService {
   public:
-    trust::CertificateRef createCertificate(ByteView) override { throw std::bad_alloc(); }
+    trust::CertificateRef parseCertificate(ByteView) const override { throw std::bad_alloc(); }
 };
 
 TEST_F(SatchelVerification, RefusesWhenMemoryRunsOut) {

@@ -16,10 +16,12 @@ using test::MessageCapture;
 class ServerTrust : public testing::Test {
   protected:
     void SetUp() override {
-        const trust::PolicyRef initial = trust::createPinnedServerPolicy("api.lumora.example");
+        const trust::PolicyRef initial = trust::pinnedServerPolicy("api.lumora.example");
         trust::CertificateRef certificate =
-            run.platform.trust.createCertificate(foundation::asBytes("server"));
-        ASSERT_EQ(run.platform.trust.createTrust({certificate}, initial, serverTrust), trust::kSuccess);
+            run.platform.trust.parseCertificate(foundation::asBytes("server"));
+        const auto made = run.platform.trust.makeTrust({certificate}, initial);
+        ASSERT_TRUE(made);
+        serverTrust = *made;
         run.platform.trust.policies.clear();
     }
 
@@ -55,7 +57,7 @@ TEST_F(ServerTrust, AServerThatSatisfiesThePinnedPolicyIsAccepted) {
     EXPECT_EQ(credential->trust, serverTrust);
     ASSERT_EQ(run.platform.trust.policies.size(), 1U);
     EXPECT_EQ(run.platform.trust.policies[0]->options,
-              trust::createPinnedServerPolicy("api.lumora.example")->options);
+              trust::pinnedServerPolicy("api.lumora.example")->options);
 }
 
 TEST_F(ServerTrust, VerdictsProceedAndUnspecifiedBothCount) {
@@ -88,7 +90,7 @@ TEST_F(ServerTrust, AServerThatFailsThePinnedPolicyMayPassTheCompatibilityPolicy
               "Certificate trust evaluation did not return expected result. (5) marker missing\n");
     ASSERT_EQ(run.platform.trust.policies.size(), 2U);
     EXPECT_EQ(run.platform.trust.policies[1]->options,
-              trust::createCompatibilityServerPolicy("api.lumora.example")->options);
+              trust::compatibilityServerPolicy("api.lumora.example")->options);
 }
 
 TEST_F(ServerTrust, AServerThatFailsBothIsReportedTwiceAndRefused) {

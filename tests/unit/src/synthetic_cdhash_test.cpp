@@ -128,7 +128,7 @@ TEST_F(SyntheticCDHash, WhenTheSignatureIsNotTakenFailsWithTheServicesStatus) {
 }
 
 TEST_F(SyntheticCDHash, WithoutSigningInformationFailsWithTheServicesStatus) {
-    platform.codeSigning.copyStatus = -67061;
+    platform.codeSigning.informationStatus = -67061;
     EXPECT_EQ(ask(), -67061);
     expectNothingStored();
     ASSERT_EQ(lines.size(), 1U);

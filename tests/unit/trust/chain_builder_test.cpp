@@ -217,13 +217,13 @@ class ExhaustedSearch : public testing::TestWithParam<Bounded> {};
 TEST_P(ExhaustedSearch, ReportsTheBoundAsTheOnlyCause) {
     const Scene scene = GetParam().make();
     const auto trust = scene.trust(anchorOnly());
-    Verdict verdict{};
-    ASSERT_EQ(trust->evaluate(verdict), kSuccess);
-    EXPECT_EQ(verdict, Verdict::recoverableFailure);
-    EXPECT_TRUE(trust->copyFailureDescription().value_or("").ends_with(kGivenUp))
-        << trust->copyFailureDescription().value_or("");
-    ASSERT_EQ(trust->copyProperties().size(), 1U);
-    EXPECT_EQ(trust->copyProperties()[0]["error"], foundation::Value(kGivenUp));
+    const auto verdict = trust->evaluate();
+    ASSERT_TRUE(verdict);
+    EXPECT_EQ(*verdict, Verdict::recoverableFailure);
+    EXPECT_TRUE(trust->failureDescription().value_or("").ends_with(kGivenUp))
+        << trust->failureDescription().value_or("");
+    ASSERT_EQ(trust->properties().size(), 1U);
+    EXPECT_EQ(trust->properties()[0]["error"], foundation::Value(kGivenUp));
 }
 
 TEST_P(ExhaustedSearch, FindsALeafThatIsDistrustedAllTheSame) {
@@ -241,10 +241,10 @@ INSTANTIATE_TEST_SUITE_P(Of, ExhaustedSearch,
 TEST(CompleteSearch, NamesItsCause) {
     for (const Scene& scene : {ladder(3, 3), tower(kMaximumChainLength)}) {
         const auto trust = scene.trust(anchorOnly());
-        Verdict verdict{};
-        trust->evaluate(verdict);
-        EXPECT_EQ(verdict, Verdict::recoverableFailure);
-        EXPECT_FALSE(trust->copyFailureDescription().value_or("").ends_with(kGivenUp));
+        const auto verdict = trust->evaluate();
+        ASSERT_TRUE(verdict);
+        EXPECT_EQ(*verdict, Verdict::recoverableFailure);
+        EXPECT_FALSE(trust->failureDescription().value_or("").ends_with(kGivenUp));
     }
 }
 

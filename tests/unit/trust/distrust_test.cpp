@@ -26,8 +26,8 @@ struct Judged {
 
 std::vector<Judged> everyPolicy() {
     return {{"Ticket", TicketChain(), ticketPolicy()},
-            {"PinnedServer", ServerChain(kHost), *createPinnedServerPolicy(kHost)},
-            {"CompatibilityServer", ServerChain(kHost), *createCompatibilityServerPolicy(kHost)},
+            {"PinnedServer", ServerChain(kHost), *pinnedServerPolicy(kHost)},
+            {"CompatibilityServer", ServerChain(kHost), *compatibilityServerPolicy(kHost)},
             {"NoOption", TicketChain(), {"1.2.3", std::nullopt, {}}}};
 }
 

@@ -1,21 +1,17 @@
 // Prints the ticket policy of the security library that the dynamic loader finds.
 #include <iostream>
+#include <optional>
 
 #include "trust/trust_service.h"
 
 int main() {
     using namespace pinwell::trust;
     const auto service = makeTrustService([] { return Anchors{}; }, Date::now);
-    PolicyRef policy;
-    switch (service->createNamedPolicy("SecPolicyCreateOstrelQuillonPlusTicket", policy)) {
-        case NamedPolicyOutcome::unavailable:
-            std::cout << "unavailable";
-            break;
-        case NamedPolicyOutcome::refused:
-            std::cout << "refused";
-            break;
-        case NamedPolicyOutcome::created:
-            std::cout << "created " << policy->oid;
-            break;
-    }
+    const std::optional<PolicyRef> policy = service->namedPolicy("SecPolicyCreateOstrelQuillonPlusTicket");
+    if (!policy)
+        std::cout << "unavailable";
+    else if (*policy == nullptr)
+        std::cout << "refused";
+    else
+        std::cout << "created " << (*policy)->oid;
 }

@@ -55,16 +55,15 @@ struct Scene {
     std::shared_ptr<Trust> trust(Policy policy) const {
         const auto trustService = service();
         std::vector<CertificateRef> certificates;
-        for (const Data& der : list) certificates.push_back(trustService->createCertificate(der));
-        std::shared_ptr<Trust> result;
-        trustService->createTrust(certificates, std::make_shared<const Policy>(std::move(policy)), result);
-        return result;
+        for (const Data& der : list) certificates.push_back(trustService->parseCertificate(der));
+        const auto made =
+            trustService->makeTrust(certificates, std::make_shared<const Policy>(std::move(policy)));
+        return made ? *made : nullptr;
     }
 
     Verdict verdict(Policy policy) const {
-        Verdict result = Verdict::invalid;
-        trust(std::move(policy))->evaluate(result);
-        return result;
+        const auto verdict = trust(std::move(policy))->evaluate();
+        return verdict ? *verdict : Verdict::invalid;
     }
 };
 

@@ -11,6 +11,7 @@
 namespace pinwell::trust {
 namespace {
 
+using test::statusOf;
 using test::TicketChain;
 
 Scene brokenLeaf() {
@@ -21,85 +22,79 @@ Scene brokenLeaf() {
 
 TEST(Trust, NamesTheCertificateAtFaultAndTheReason) {
     const auto trust = brokenLeaf().trust(ticketPolicy());
-    Verdict verdict{};
-    trust->evaluate(verdict);
-    EXPECT_EQ(trust->copyFailureDescription(),
+    EXPECT_TRUE(trust->evaluate());
+    EXPECT_EQ(trust->failureDescription(),
               "Certificate \"Ticket Signer\": the leaf marker 1.2.840.177245.100.6.1.30 is missing");
 }
 
 TEST(Trust, HasPropertiesForEachCertificateOfTheChain) {
     const auto trust = brokenLeaf().trust(ticketPolicy());
-    Verdict verdict{};
-    trust->evaluate(verdict);
+    EXPECT_TRUE(trust->evaluate());
     const Array expected{Dictionary{{"title", "Ticket Signer"},
                                     {"error", "the leaf marker 1.2.840.177245.100.6.1.30 is missing"}},
                          Dictionary{{"title", "Ticket Intermediate"}}, Dictionary{{"title", "Ticket Root"}}};
-    EXPECT_EQ(trust->copyProperties(), expected);
+    EXPECT_EQ(trust->properties(), expected);
 }
 
 TEST(Trust, HasNothingToSayAfterSuccess) {
     const auto trust = Scene(TicketChain()).trust(ticketPolicy());
-    Verdict verdict{};
-    trust->evaluate(verdict);
-    EXPECT_EQ(trust->copyFailureDescription(), std::nullopt);
-    EXPECT_EQ(trust->copyProperties().size(), 3U);
+    EXPECT_TRUE(trust->evaluate());
+    EXPECT_EQ(trust->failureDescription(), std::nullopt);
+    EXPECT_EQ(trust->properties().size(), 3U);
 }
 
 TEST(Trust, HasNeitherKeyNorPropertiesBeforeItsEvaluation) {
     const auto trust = brokenLeaf().trust(ticketPolicy());
-    EXPECT_EQ(trust->copyPublicKey(), nullptr);
-    EXPECT_TRUE(trust->copyProperties().empty());
-    EXPECT_EQ(trust->copyFailureDescription(), std::nullopt);
+    EXPECT_EQ(trust->publicKey(), nullptr);
+    EXPECT_TRUE(trust->properties().empty());
+    EXPECT_EQ(trust->failureDescription(), std::nullopt);
 }
 
 TEST(Trust, ForgetsItsVerdictWithANewPolicy) {
     const auto trust = brokenLeaf().trust(ticketPolicy());
-    Verdict verdict{};
-    trust->evaluate(verdict);
+    EXPECT_TRUE(trust->evaluate());
     Policy lenient = ticketPolicy();
     lenient.options.erase(std::string(option::kLeafMarkerOid));
-    EXPECT_EQ(trust->setPolicy(std::make_shared<const Policy>(lenient)), kSuccess);
-    EXPECT_EQ(trust->copyFailureDescription(), std::nullopt);
-    EXPECT_EQ(trust->copyPublicKey(), nullptr);
-    trust->evaluate(verdict);
-    EXPECT_EQ(verdict, Verdict::unspecified);
+    EXPECT_TRUE(trust->setPolicy(std::make_shared<const Policy>(lenient)));
+    EXPECT_EQ(trust->failureDescription(), std::nullopt);
+    EXPECT_EQ(trust->publicKey(), nullptr);
+    const auto verdict = trust->evaluate();
+    ASSERT_TRUE(verdict);
+    EXPECT_EQ(*verdict, Verdict::unspecified);
 }
 
 TEST(Trust, RefusesToBeWithoutAPolicy) {
-    EXPECT_EQ(brokenLeaf().trust(ticketPolicy())->setPolicy(nullptr), kParameterError);
+    EXPECT_EQ(statusOf(brokenLeaf().trust(ticketPolicy())->setPolicy(nullptr)), kParameterError);
 }
 
 TEST(Trust, VerifiesSignaturesWithItsLeafsKey) {
     const Scene scene{TicketChain()};
     const auto trust = scene.trust(ticketPolicy());
-    Verdict verdict{};
-    trust->evaluate(verdict);
-    ASSERT_NE(trust->copyPublicKey(), nullptr);
+    EXPECT_TRUE(trust->evaluate());
+    ASSERT_NE(trust->publicKey(), nullptr);
     const auto message = foundation::asBytes("message");
     Data field = scene.chain.leaf.key.sign(message);
     field.resize(72);
-    EXPECT_EQ(scene.service()->verifySignature(*trust->copyPublicKey(), message, field), std::nullopt);
-    const auto error =
-        scene.service()->verifySignature(*trust->copyPublicKey(), foundation::asBytes("other"), field);
-    ASSERT_TRUE(error);
-    EXPECT_EQ(error->domain(), foundation::kOSStatusErrorDomain);
-    EXPECT_EQ(error->code(), kSignatureError);
+    const PublicKeyRef key = trust->publicKey();
+    EXPECT_TRUE(scene.service()->verifySignature(*key, message, field));
+    const auto refused = scene.service()->verifySignature(*key, foundation::asBytes("other"), field);
+    ASSERT_FALSE(refused);
+    EXPECT_EQ(refused.error().domain(), foundation::kOSStatusErrorDomain);
+    EXPECT_EQ(refused.error().code(), kSignatureError);
 }
 
 TEST(TrustCreation, RefusesListsThatAreEmptyTooLongOrForeign) {
     const auto service = Scene(TicketChain()).service();
     const auto policy = std::make_shared<const Policy>(ticketPolicy());
-    const CertificateRef one = service->createCertificate(TicketChain().issue().leaf.der);
-    std::shared_ptr<Trust> trust;
-    EXPECT_EQ(service->createTrust({}, policy, trust), kParameterError);
-    EXPECT_EQ(service->createTrust({nullptr}, policy, trust), kParameterError);
-    EXPECT_EQ(service->createTrust({one}, nullptr, trust), kParameterError);
-    EXPECT_EQ(service->createTrust({std::make_shared<test::FakeCertificate>(one->der())}, policy, trust),
+    const CertificateRef one = service->parseCertificate(TicketChain().issue().leaf.der);
+    EXPECT_EQ(statusOf(service->makeTrust({}, policy)), kParameterError);
+    EXPECT_EQ(statusOf(service->makeTrust({nullptr}, policy)), kParameterError);
+    EXPECT_EQ(statusOf(service->makeTrust({one}, nullptr)), kParameterError);
+    EXPECT_EQ(statusOf(service->makeTrust({std::make_shared<test::FakeCertificate>(one->der())}, policy)),
               kParameterError);
-    EXPECT_EQ(service->createTrust(std::vector(kMaximumCertificates + 1, one), policy, trust),
+    EXPECT_EQ(statusOf(service->makeTrust(std::vector(kMaximumCertificates + 1, one), policy)),
               kParameterError);
-    EXPECT_EQ(trust, nullptr);
-    EXPECT_EQ(service->createTrust(std::vector(kMaximumCertificates, one), policy, trust), kSuccess);
+    EXPECT_EQ(statusOf(service->makeTrust(std::vector(kMaximumCertificates, one), policy)), kSuccess);
 }
 
 struct BadOption {
@@ -114,10 +109,10 @@ TEST_P(UnjudgeablePolicy, TrustsNothing) {
     Policy policy = ticketPolicy();
     policy.options.insert_or_assign(std::string(GetParam().key), GetParam().value);
     const auto trust = Scene(TicketChain()).trust(policy);
-    Verdict verdict{};
-    EXPECT_EQ(trust->evaluate(verdict), kSuccess);
-    EXPECT_EQ(verdict, Verdict::otherError);
-    EXPECT_NE(trust->copyFailureDescription().value_or("").find(GetParam().key), std::string::npos);
+    const auto verdict = trust->evaluate();
+    ASSERT_TRUE(verdict);
+    EXPECT_EQ(*verdict, Verdict::otherError);
+    EXPECT_NE(trust->failureDescription().value_or("").find(GetParam().key), std::string::npos);
 }
 
 INSTANTIATE_TEST_SUITE_P(
@@ -173,15 +168,14 @@ TEST(PolicyOption, OfSeveralMarkersRequiresAll) {
 }
 
 TEST(ServerPolicy, IsNotMadeForAnEmptyHost) {
-    EXPECT_EQ(createPinnedServerPolicy(""), nullptr);
-    EXPECT_EQ(createCompatibilityServerPolicy(""), nullptr);
+    EXPECT_EQ(pinnedServerPolicy(""), nullptr);
+    EXPECT_EQ(compatibilityServerPolicy(""), nullptr);
 }
 
 TEST(ServerPolicy, AcceptsAnAddressThatTheCertificateNames) {
-    EXPECT_EQ(Scene(test::ServerChain("127.0.0.1")).verdict(*createPinnedServerPolicy("127.0.0.1")),
+    EXPECT_EQ(Scene(test::ServerChain("127.0.0.1")).verdict(*pinnedServerPolicy("127.0.0.1")),
               Verdict::unspecified);
-    EXPECT_EQ(Scene(test::ServerChain("::1")).verdict(*createPinnedServerPolicy("::1")),
-              Verdict::unspecified);
+    EXPECT_EQ(Scene(test::ServerChain("::1")).verdict(*pinnedServerPolicy("::1")), Verdict::unspecified);
 }
 
 TEST(TrustService, ReadsItsAnchorsOnceAndOnlyWhenNeeded) {
@@ -194,17 +188,16 @@ TEST(TrustService, ReadsItsAnchorsOnceAndOnlyWhenNeeded) {
         },
         [] { return kNow; });
     std::vector<CertificateRef> list;
-    for (const Data& der : chain.list()) list.push_back(service->createCertificate(der));
+    for (const Data& der : chain.list()) list.push_back(service->parseCertificate(der));
     const auto policy = std::make_shared<const Policy>(ticketPolicy());
     EXPECT_EQ(loads, 0);
     std::vector<std::thread> threads;
     std::atomic<int> trusted = 0;
     for (int i = 0; i < 4; ++i) {
         threads.emplace_back([&] {
-            std::shared_ptr<Trust> trust;
-            Verdict verdict{};
-            if (service->createTrust(list, policy, trust) == kSuccess) trust->evaluate(verdict);
-            if (verdict == Verdict::unspecified) ++trusted;
+            const auto trust = service->makeTrust(list, policy);
+            const auto verdict = trust ? (*trust)->evaluate() : trust.error();
+            if (verdict && *verdict == Verdict::unspecified) ++trusted;
         });
     }
     for (std::thread& thread : threads) thread.join();
