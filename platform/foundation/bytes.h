@@ -31,6 +31,11 @@ inline Data toData(ByteView bytes) {
     return {bytes.begin(), bytes.end()};
 }
 
+/// The bytes as text, not copied; no encoding is assumed.
+inline std::string_view asText(ByteView bytes) {
+    return {static_cast<const char*>(static_cast<const void*>(bytes.data())), bytes.size()};
+}
+
 /// The bytes as text, copied; no encoding is assumed.
 inline std::string toString(ByteView bytes) {
     std::string text(bytes.size(), '\0');

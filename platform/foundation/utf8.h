@@ -14,4 +14,9 @@ bool isUTF8(std::string_view text) noexcept;
 /// Whether one well-formed sequence is a control character: C0, DEL or C1.
 bool isControlCharacter(std::string_view sequence) noexcept;
 
+/// White space of ASCII. Unlike the C library's function, independent of the locale.
+constexpr bool isSpace(char c) {
+    return c == ' ' || (c >= '\t' && c <= '\r');
+}
+
 }  // namespace pinwell::foundation

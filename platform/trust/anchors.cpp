@@ -2,8 +2,8 @@
 
 #include <algorithm>
 
+#include "foundation/bytes.h"
 #include "foundation/format.h"
-#include "trust/byte_text.h"
 #include "trust/pem.h"
 
 namespace pinwell::trust {
@@ -22,7 +22,7 @@ bool contains(const CertificateList& list, const X509Certificate& certificate) {
 std::optional<CertificateList> readPem(ByteView text) {
     if (text.size() > kMaximumPemFileSize) return std::nullopt;
     CertificateList certificates;
-    for (const PemBlock& block : readPemBlocks(asText(text))) {
+    for (const PemBlock& block : readPemBlocks(foundation::asText(text))) {
         if (!block.data) return std::nullopt;
         if (!isCertificateBlock(block)) continue;
         X509CertificateRef certificate = X509Certificate::parse(*block.data);
@@ -36,7 +36,7 @@ std::optional<CertificateList> readPem(ByteView text) {
 void readDeniedPem(ByteView text, DenyList& into, const std::function<void(const std::string&)>& report) {
     std::size_t certificates = 0;
     std::size_t damaged = 0;
-    for (const PemBlock& block : readPemBlocks(asText(text))) {
+    for (const PemBlock& block : readPemBlocks(foundation::asText(text))) {
         std::string_view damage = block.damage;
         if (block.data) {
             // OpenSSL's "trusted" form is a certificate with trailing data.

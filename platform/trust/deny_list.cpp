@@ -1,6 +1,6 @@
 #include "trust/deny_list.h"
 
-#include "trust/byte_text.h"
+#include "foundation/bytes.h"
 #include "trust/der_cursor.h"
 
 namespace pinwell::trust {
@@ -37,7 +37,7 @@ DenyList::DenyList(const CertificateList& certificates) {
 
 void DenyList::add(const X509CertificateRef& certificate) {
     certificates_.push_back(certificate);
-    signedParts_.insert(std::string(asText(certificate->parts().signedPart)));
+    signedParts_.insert(std::string(foundation::asText(certificate->parts().signedPart)));
     keys_.insert(foundation::toString(certificate->subjectKey().identity));
     ++size_;
 }

@@ -8,7 +8,6 @@
 #include "foundation/byte_reader.h"
 #include "foundation/byte_writer.h"
 #include "foundation/utf8.h"
-#include "trust/byte_text.h"
 #include "trust/der_cursor.h"
 
 namespace pinwell::trust {
@@ -105,7 +104,7 @@ std::optional<std::string> readText(const Element& value) {
 std::string fold(const std::string& text) {
     std::string folded;
     for (const char c : text) {
-        if (isSpace(c)) {
+        if (foundation::isSpace(c)) {
             if (!folded.empty() && folded.back() != ' ') folded.push_back(' ');
         } else {
             folded.push_back(c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c);

@@ -4,7 +4,7 @@
 #include <string>
 
 #include "foundation/base64.h"
-#include "trust/byte_text.h"
+#include "foundation/utf8.h"
 
 namespace pinwell::trust {
 namespace {
@@ -74,7 +74,7 @@ class BlockReader {
     static void readBody(PemBlock& block, std::string_view body) {
         std::string base64;
         std::copy_if(body.begin(), body.end(), std::back_inserter(base64),
-                     [](char c) { return !isSpace(c); });
+                     [](char c) { return !foundation::isSpace(c); });
         block.data = foundation::decodeBase64(base64);
         if (!block.data) block.damage = "it is not in base64";
     }
