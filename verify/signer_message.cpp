@@ -9,7 +9,7 @@
 #include "codesign/cms_signature.h"
 #include "codesign/code_error.h"
 #include "trust/certificate.h"
-#include "trust/der_cursor.h"
+#include "trust/der.h"
 #include "trust/signature_algorithm.h"
 
 namespace pinwell::verify {

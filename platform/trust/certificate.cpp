@@ -4,7 +4,7 @@
 #include <array>
 
 #include "foundation/description.h"
-#include "trust/der_cursor.h"
+#include "trust/der.h"
 #include "trust/openssl.h"
 
 namespace pinwell::trust {

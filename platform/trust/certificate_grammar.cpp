@@ -1,6 +1,6 @@
 #include "trust/certificate_grammar.h"
 
-#include "trust/der_cursor.h"
+#include "trust/der.h"
 
 namespace pinwell::trust {
 namespace {

@@ -1,7 +1,7 @@
 #include "trust/deny_list.h"
 
 #include "foundation/bytes.h"
-#include "trust/der_cursor.h"
+#include "trust/der.h"
 
 namespace pinwell::trust {
 namespace {

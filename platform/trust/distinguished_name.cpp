@@ -8,7 +8,7 @@
 #include "foundation/byte_reader.h"
 #include "foundation/byte_writer.h"
 #include "foundation/utf8.h"
-#include "trust/der_cursor.h"
+#include "trust/der.h"
 
 namespace pinwell::trust {
 namespace {

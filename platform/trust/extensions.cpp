@@ -4,7 +4,7 @@
 #include <array>
 #include <set>
 
-#include "trust/der_cursor.h"
+#include "trust/der.h"
 
 namespace pinwell::trust {
 namespace {

@@ -11,7 +11,7 @@
 #include <vector>
 
 #include "foundation/bytes.h"
-#include "trust/der_cursor.h"
+#include "trust/der.h"
 
 namespace pinwell::trust {
 

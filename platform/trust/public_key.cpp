@@ -4,7 +4,7 @@
 #include <openssl/param_build.h>
 #include <openssl/rsa.h>
 
-#include "trust/der_cursor.h"
+#include "trust/der.h"
 #include "trust/ecdsa.h"
 #include "trust/openssl.h"
 

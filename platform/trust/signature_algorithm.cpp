@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <array>
 
-#include "trust/der_cursor.h"
+#include "trust/der.h"
 
 namespace pinwell::trust {
 namespace {

@@ -6,7 +6,7 @@
 
 #include "foundation/byte_reader.h"
 #include "foundation/byte_writer.h"
-#include "trust/der_cursor.h"
+#include "trust/der.h"
 
 namespace pinwell::trust {
 namespace {

@@ -1,4 +1,4 @@
-#include "trust/der_cursor.h"
+#include "trust/der.h"
 
 #include <gtest/gtest.h>
 

@@ -5,7 +5,7 @@
 #include <gtest/gtest.h>
 
 #include "elements.h"
-#include "trust/der_cursor.h"
+#include "trust/der.h"
 
 namespace pinwell::trust {
 namespace {

@@ -7,7 +7,7 @@
 #include "support/certificate_builder.h"
 #include "support/key_forms.h"
 #include "trust/certificate.h"
-#include "trust/der_cursor.h"
+#include "trust/der.h"
 
 namespace pinwell::trust {
 namespace {
