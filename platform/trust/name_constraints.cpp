@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "trust/host_name.h"
+#include "trust/general_name.h"
 
 namespace pinwell::trust {
 namespace {

@@ -4,7 +4,7 @@
 
 #include "foundation/date.h"
 #include "foundation/format.h"
-#include "trust/host_name.h"
+#include "trust/general_name.h"
 
 namespace pinwell::trust {
 namespace {

@@ -3,7 +3,7 @@
 #include <gtest/gtest.h>
 
 #include "elements.h"
-#include "trust/host_name.h"
+#include "trust/general_name.h"
 
 namespace pinwell::trust {
 namespace {

@@ -1,4 +1,4 @@
-#include "trust/host_name.h"
+#include "trust/general_name.h"
 
 #include <gtest/gtest.h>
 
