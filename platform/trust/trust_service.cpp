@@ -6,9 +6,9 @@
 
 #include "foundation/format.h"
 #include "trust/chain_builder.h"
-#include "trust/ecdsa.h"
 #include "trust/named_policy.h"
 #include "trust/policy_checks.h"
+#include "trust/public_key.h"
 #include "trust/requirements.h"
 
 namespace pinwell::trust {

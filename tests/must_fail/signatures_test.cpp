@@ -3,7 +3,7 @@
 
 #include "result_table.h"
 #include "support/certificate_builder.h"
-#include "trust/ecdsa.h"
+#include "trust/public_key.h"
 #include "unit/trust/published_signatures.h"
 
 namespace pinwell::trust {

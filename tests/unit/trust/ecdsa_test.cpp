@@ -1,4 +1,4 @@
-#include "trust/ecdsa.h"
+#include "trust/public_key.h"
 
 #include <gtest/gtest.h>
 
