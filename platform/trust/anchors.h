@@ -2,13 +2,75 @@
 #pragma once
 
 #include <functional>
+#include <optional>
 #include <string>
+#include <string_view>
+#include <unordered_set>
 #include <vector>
 
+#include "foundation/bytes.h"
 #include "foundation/platform_directory.h"
-#include "trust/deny_list.h"
+#include "trust/certificate.h"
 
 namespace pinwell::trust {
+
+// Blocks of a PEM text (RFC 7468, in its lax form).
+//
+//   -----BEGIN LABEL-----
+//   base64, with white space anywhere
+//   -----END LABEL-----
+//
+// Text outside blocks is skipped. A block extends to the next marker. If that is not its own end, the block
+// is damaged; the next block is still read.
+
+struct PemBlock {
+    std::string_view label;                // a view into the text
+    std::size_t line = 0;                  // of its first marker, from 1
+    std::optional<foundation::Data> data;  // `nullopt` if it is damaged
+    std::string_view damage;               // why, for people; empty otherwise
+};
+
+/// In the order of the text. Time and memory are linear in its length.
+std::vector<PemBlock> readPemBlocks(std::string_view text);
+
+/// Whether the block's label is "CERTIFICATE" or one of its two older forms.
+bool isCertificateBlock(const PemBlock& block);
+
+// The certificates that the user distrusts, and the effect of that.
+
+using CertificateList = std::vector<X509CertificateRef>;
+
+/// Distrust applies to a certificate's contents and to its key, not to its bytes. A signature has
+/// several encodings: from (r, s) of ECDSA anyone can make (r, n - s), which verifies as well. A key
+/// can be certified again: later, by another authority, with another name, algorithm or form of its
+/// point.
+class DenyList {
+  public:
+    DenyList() = default;
+    DenyList(const CertificateList& certificates);  // NOLINT(google-explicit-constructor): the same thing
+
+    void add(const X509CertificateRef& certificate);
+
+    /// Adds a certificate that X509Certificate::parse refuses, because it may contain the key of an accepted
+    /// one. Returns false, and adds nothing, if its signed part or its key cannot be found.
+    bool addUnreadable(ByteView der);
+
+    /// Whether the certificate has the same contents as one on the list (tbsCertificate, RFC 5280, 4.1.1.1),
+    /// or the same key.
+    bool reaches(const X509Certificate& certificate) const;
+
+    /// The readable ones.
+    const CertificateList& certificates() const noexcept { return certificates_; }
+
+    /// The number of all, also of unreadable ones.
+    std::size_t size() const noexcept { return size_; }
+
+  private:
+    CertificateList certificates_;
+    std::unordered_set<std::string> signedParts_;
+    std::unordered_set<std::string> keys_;
+    std::size_t size_ = 0;
+};
 
 /// Maximum size of a PEM file with trusted certificates; a larger file is ignored. A system's list of public
 /// authorities has a quarter of a megabyte.

@@ -234,4 +234,12 @@ std::unique_ptr<TrustService> makeTrustService(std::function<Anchors()> loadAnch
         std::make_shared<Environment>(std::move(loadAnchors), std::move(now)), std::move(securityLibrary));
 }
 
+std::unique_ptr<TrustService> makeTrustService(foundation::PlatformDirectory directory,
+                                               std::function<void(std::string_view)> logError,
+                                               std::function<Date()> now) {
+    return makeTrustService([directory = std::move(directory),
+                             logError = std::move(logError)] { return loadAnchors(directory, logError); },
+                            std::move(now));
+}
+
 }  // namespace pinwell::trust

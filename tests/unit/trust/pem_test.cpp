@@ -1,4 +1,4 @@
-#include "trust/pem.h"
+#include "trust/anchors.h"
 
 #include <gtest/gtest.h>
 
