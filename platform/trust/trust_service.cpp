@@ -9,7 +9,6 @@
 #include "trust/named_policy.h"
 #include "trust/policy_checks.h"
 #include "trust/public_key.h"
-#include "trust/requirements.h"
 
 namespace pinwell::trust {
 namespace {

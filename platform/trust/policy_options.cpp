@@ -1,12 +1,14 @@
-#include "trust/requirements.h"
-
+// The options of policies: reading them, and those of the two policies for servers.
 #include <algorithm>
 #include <array>
 
 #include "foundation/format.h"
 #include "foundation/value.h"
+#include "trust/policy_checks.h"
+#include "trust/trust.h"
 
 namespace pinwell::trust {
+
 namespace {
 
 using foundation::Result;
@@ -119,6 +121,54 @@ Result<Requirements> readRequirements(const Dictionary& options) {
     // Both anchor options together: each must hold, and the platform's own anchors are in both sets.
     if (options.contains(option::kPlatformAnchor)) requirements.anchors = AnchorSet::platform;
     return requirements;
+}
+
+// The two TLS policies of the record service and its asset servers.
+
+namespace {
+
+constexpr std::int64_t kMinimumRsaBits = 2048;
+constexpr std::int64_t kMinimumEllipticCurveBits = 256;
+
+// Our own identifiers, next to the ticket-signing policy's.
+constexpr std::string_view kPinnedServerPolicyOid = "1.2.840.177245.100.1.27.1";
+constexpr std::string_view kCompatibilityServerPolicyOid = "1.2.840.177245.100.1.27.2";
+
+Dictionary serverOptions(std::string_view host) {
+    Dictionary keySizes;
+    keySizes.emplace(kKeyTypeRSA, kMinimumRsaBits);
+    keySizes.emplace(kKeyTypeEllipticCurve, kMinimumEllipticCurveBits);
+
+    Dictionary options;
+    options.emplace(option::kValidityDates, true);
+    options.emplace(option::kHostName, host);
+    options.emplace(option::kServerAuthentication, true);
+    options.emplace(option::kNameConstraints, true);
+    options.emplace(option::kBasicConstraints, true);
+    options.emplace(option::kCriticalExtensions, true);
+    options.emplace(option::kKeySize, std::move(keySizes));
+    return options;
+}
+
+PolicyRef makePolicy(std::string_view oid, Dictionary options) {
+    return std::make_shared<const Policy>(Policy{std::string(oid), std::string(oid), std::move(options)});
+}
+
+}  // namespace
+
+PolicyRef pinnedServerPolicy(std::string_view host) {
+    if (host.empty()) return nullptr;
+    Dictionary options = serverOptions(host);
+    options.emplace(option::kPlatformAnchor, Dictionary{});
+    options.emplace(option::kLeafMarkerOid, kPinnedServerMarkerOid);
+    return makePolicy(kPinnedServerPolicyOid, std::move(options));
+}
+
+PolicyRef compatibilityServerPolicy(std::string_view host) {
+    if (host.empty()) return nullptr;
+    Dictionary options = serverOptions(host);
+    options.emplace(option::kCompatibilityAnchor, Dictionary{});
+    return makePolicy(kCompatibilityServerPolicyOid, std::move(options));
 }
 
 }  // namespace pinwell::trust
