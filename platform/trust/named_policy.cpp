@@ -1,4 +1,4 @@
-#include "trust/named_policy.h"
+#include "trust/trust_service.h"
 
 #include <dlfcn.h>
 

@@ -6,7 +6,6 @@
 
 #include "foundation/format.h"
 #include "trust/chain_builder.h"
-#include "trust/named_policy.h"
 #include "trust/policy_checks.h"
 #include "trust/public_key.h"
 
