@@ -31,7 +31,7 @@
 #include "lumora-local/upkeep_verbs.h"
 #include "sandbox/sandbox.h"
 #include "src/confinement.h"
-#include "trust/openssl_memory.h"
+#include "trust/openssl.h"
 
 namespace {
 

@@ -39,4 +39,8 @@ inline foundation::ByteView byteView(const ASN1_STRING* string) {
     return byteView(ASN1_STRING_get0_data(string), ASN1_STRING_length(string));
 }
 
+/// Makes OpenSSL wipe all memory that it frees; by default it wipes only some copies of a key. Call it before
+/// OpenSSL allocates, first in main; returns false if it is too late.
+bool wipeWhatOpenSSLFrees() noexcept;
+
 }  // namespace pinwell::trust

@@ -20,7 +20,7 @@
 #include "lumora-local/ticket_maker.h"
 #include "lumora-local/tls_context.h"
 #include "support/temporary_directory.h"
-#include "trust/openssl_memory.h"
+#include "trust/openssl.h"
 
 namespace pinwell::lumora {
 namespace {

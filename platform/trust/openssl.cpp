@@ -1,4 +1,4 @@
-#include "trust/openssl_memory.h"
+#include "trust/openssl.h"
 
 #include <malloc.h>
 #include <openssl/crypto.h>
