@@ -20,7 +20,7 @@
 #include "src/host_platform.h"
 #include "src/messages.h"
 #include "ticket/commands.h"
-#include "trust/openssl_memory.h"
+#include "trust/openssl.h"
 
 namespace {
 

@@ -1,4 +1,13 @@
-// The certificates of the platform directory, and reading them from PEM.
+// The certificates of the platform directory: trusted ones, distrusted ones, and reading them from PEM.
+//
+// A PEM text has blocks (RFC 7468, in its lax form):
+//
+//   -----BEGIN LABEL-----
+//   base64, with white space anywhere
+//   -----END LABEL-----
+//
+// Text outside blocks is skipped. A block extends to the next marker. If that is not its own end, the block
+// is damaged; the next block is still read.
 #pragma once
 
 #include <functional>
@@ -14,15 +23,6 @@
 
 namespace pinwell::trust {
 
-// Blocks of a PEM text (RFC 7468, in its lax form).
-//
-//   -----BEGIN LABEL-----
-//   base64, with white space anywhere
-//   -----END LABEL-----
-//
-// Text outside blocks is skipped. A block extends to the next marker. If that is not its own end, the block
-// is damaged; the next block is still read.
-
 struct PemBlock {
     std::string_view label;                // a view into the text
     std::size_t line = 0;                  // of its first marker, from 1
@@ -36,14 +36,12 @@ std::vector<PemBlock> readPemBlocks(std::string_view text);
 /// Whether the block's label is "CERTIFICATE" or one of its two older forms.
 bool isCertificateBlock(const PemBlock& block);
 
-// The certificates that the user distrusts, and the effect of that.
-
 using CertificateList = std::vector<X509CertificateRef>;
 
-/// Distrust applies to a certificate's contents and to its key, not to its bytes. A signature has
-/// several encodings: from (r, s) of ECDSA anyone can make (r, n - s), which verifies as well. A key
-/// can be certified again: later, by another authority, with another name, algorithm or form of its
-/// point.
+/// The certificates that the user distrusts. Distrust applies to a certificate's contents and to its key, not
+/// to its bytes. A signature has several encodings: from (r, s) of ECDSA anyone can make (r, n - s), which
+/// verifies as well. A key can be certified again: later, by another authority, with another name, algorithm
+/// or form of its point.
 class DenyList {
   public:
     DenyList() = default;

@@ -1,4 +1,19 @@
-// A parsed certificate with all fields that chains and checks need.
+// An X.509 certificate (RFC 5280, 4.1) with all fields that chains and checks need, read without a library.
+//
+//   Certificate     SEQUENCE { tbsCertificate, AlgorithmIdentifier, signature BIT STRING }
+//   tbsCertificate  SEQUENCE {
+//       [0] { version INTEGER }     absent for version 1; 1 and 2 mean versions 2 and 3
+//       serial number INTEGER       any, in the fewest bytes
+//       AlgorithmIdentifier         the same as outside (4.1.1.2)
+//       issuer Name
+//       SEQUENCE { notBefore, notAfter }   each UTCTime or GeneralizedTime
+//       subject Name
+//       SubjectPublicKeyInfo        subject_key.h
+//       [1] issuer's and [2] subject's unique identifier BIT STRING   from version 2
+//       [3] { Extensions } }        version 3 alone; extensions.h
+//
+// In DER: definite lengths in the shortest form, no bytes left over, nesting at most der::kMaximumNesting.
+// Also refused: other versions, and fields that the stated version does not have.
 #pragma once
 
 #include <memory>
@@ -15,23 +30,6 @@
 #include "trust/trust.h"
 
 namespace pinwell::trust {
-
-// The structure of an X.509 certificate (RFC 5280, 4.1), read without a library.
-//
-//   Certificate     SEQUENCE { tbsCertificate, AlgorithmIdentifier, signature BIT STRING }
-//   tbsCertificate  SEQUENCE {
-//       [0] { version INTEGER }     absent for version 1; 1 and 2 mean versions 2 and 3
-//       serial number INTEGER       any, in the fewest bytes
-//       AlgorithmIdentifier         the same as outside (4.1.1.2)
-//       issuer Name
-//       SEQUENCE { notBefore, notAfter }   each UTCTime or GeneralizedTime
-//       subject Name
-//       SubjectPublicKeyInfo        subject_key.h
-//       [1] issuer's and [2] subject's unique identifier BIT STRING   from version 2
-//       [3] { Extensions } }        version 3 alone; extensions.h
-//
-// In DER: definite lengths in the shortest form, no bytes left over, nesting at most der::kMaximumNesting.
-// Also refused: other versions, and fields that the stated version does not have.
 
 /// A longer certificate is refused. The same limit as that of a ticket's certificate element.
 inline constexpr std::size_t kMaximumCertificateSize = 131072;

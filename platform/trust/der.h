@@ -1,4 +1,4 @@
-// Reads DER tags and lengths (ITU-T X.690) without a schema.
+// Reads DER (ITU-T X.690): tags and lengths without a schema, and values with a known schema.
 //
 //   element = tag, length, contents
 //   tag     first byte: class (2 bits), constructed (1 bit), number (5 bits); 31 means that the number
@@ -6,6 +6,16 @@
 //   length  below 128: one byte; else a byte 0x80 + n, then n bytes, big-endian
 //
 // Refused: truncated elements, numbers and lengths not in their shortest form, indefinite lengths.
+//
+//   BOOLEAN            01 01 vv               vv is 00 or FF (11.1)
+//   INTEGER            02 n  two's complement, in the fewest bytes (8.3.2)
+//   BIT STRING         03 n  u bits           u counts the unused bits at the end, which are zero (11.2.1)
+//   OBJECT IDENTIFIER  06 n  arcs             base 128, no leading zero digit (8.19.2)
+//   UTCTime            17 0D YYMMDDhhmmssZ    50 to 99 belong to 1950 to 1999 (RFC 5280, 4.1.2.5.1)
+//   GeneralizedTime    18 0F YYYYMMDDhhmmssZ  (RFC 5280, 4.1.2.5.2)
+//
+// One departure from DER: a BOOLEAN with its default value may be present, as some authorities write it. It
+// changes no meaning.
 #pragma once
 
 #include <cstdint>
@@ -55,18 +65,6 @@ std::optional<Element> readElement(foundation::ByteView bytes);
 /// `depth` levels. So a certificate that passes has no indefinite length, which OpenSSL would
 /// accept.
 bool isNestedDefinite(foundation::ByteView bytes, unsigned depth = kMaximumNesting);
-
-// Reads the values of a DER structure with a known schema (ITU-T X.690).
-//
-//   BOOLEAN            01 01 vv               vv is 00 or FF (11.1)
-//   INTEGER            02 n  two's complement, in the fewest bytes (8.3.2)
-//   BIT STRING         03 n  u bits           u counts the unused bits at the end, which are zero (11.2.1)
-//   OBJECT IDENTIFIER  06 n  arcs             base 128, no leading zero digit (8.19.2)
-//   UTCTime            17 0D YYMMDDhhmmssZ    50 to 99 belong to 1950 to 1999 (RFC 5280, 4.1.2.5.1)
-//   GeneralizedTime    18 0F YYYYMMDDhhmmssZ  (RFC 5280, 4.1.2.5.2)
-//
-// One departure from DER: a BOOLEAN with its default value may be present, as some authorities write it. It
-// changes no meaning.
 
 /// Longer object identifiers are refused. RFC 5280, appendix B, requires readers to accept 100 bytes of the
 /// dotted form, which is longer than the contents.

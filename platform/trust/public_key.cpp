@@ -67,7 +67,6 @@ namespace {
 using BignumHandle = Handle<BIGNUM, BN_free>;
 using BuilderHandle = Handle<OSSL_PARAM_BLD, OSSL_PARAM_BLD_free>;
 using ContextHandle = Handle<EVP_PKEY_CTX, EVP_PKEY_CTX_free>;
-using DigestContext = Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
 using ParametersHandle = Handle<OSSL_PARAM, OSSL_PARAM_free>;
 using Kind = SubjectKey::Kind;
 using Scheme = SignatureAlgorithm::Scheme;
