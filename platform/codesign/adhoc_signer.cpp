@@ -2,8 +2,8 @@
 
 #include <limits>
 
+#include "codesign/byte_source.h"
 #include "codesign/code_directory.h"
-#include "codesign/read_ahead.h"
 #include "codesign/superblob.h"
 #include "foundation/byte_writer.h"
 

@@ -1,4 +1,4 @@
-#include "codesign/read_ahead.h"
+#include "codesign/byte_source.h"
 
 #include <gtest/gtest.h>
 #include <sys/resource.h>
