@@ -8,7 +8,6 @@
 #include "codesign/cms_message.h"
 #include "codesign/cms_signature.h"
 #include "codesign/code_error.h"
-#include "codesign/signer_key.h"
 
 namespace pinwell::test {
 namespace {

@@ -4,7 +4,6 @@
 #include "cms_fixture.h"
 #include "codesign/cms_message.h"
 #include "codesign/cms_signature.h"
-#include "codesign/signer_key.h"
 
 namespace pinwell::test {
 namespace {
