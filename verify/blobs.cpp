@@ -1,7 +1,7 @@
 // The checks of a superblob as a whole (signature_parts.h), independent of its blobs' contents.
 #include <algorithm>
 
-#include "codesign/disk_image_trailer.h"
+#include "codesign/static_code.h"
 #include "codesign/superblob.h"
 #include "foundation/format.h"
 #include "src/PWHashedFile/blob_set.h"

@@ -28,7 +28,7 @@
 // checksum, or a table that contradicts itself, is a fault.
 #pragma once
 
-#include "codesign/disk_image_trailer.h"
+#include "codesign/static_code.h"
 #include "verify/check.h"
 #include "verify/workers.h"
 

@@ -3,7 +3,7 @@
 #include <algorithm>
 
 #include "codesign/code_error.h"
-#include "codesign/disk_image_trailer.h"
+#include "codesign/static_code.h"
 #include "codesign/superblob.h"
 #include "formats/udif_header.h"
 #include "foundation/bytes.h"

@@ -4,7 +4,7 @@
 #include <utility>
 
 #include "codesign/code_error.h"
-#include "codesign/disk_image_trailer.h"
+#include "codesign/static_code.h"
 #include "codesign/superblob.h"
 #include "foundation/byte_reader.h"
 #include "foundation/format.h"

@@ -27,7 +27,7 @@
 #include <string_view>
 
 #include "codesign/byte_source.h"
-#include "codesign/disk_image_trailer.h"
+#include "codesign/static_code.h"
 
 namespace pinwell::codesign {
 
