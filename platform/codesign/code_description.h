@@ -81,9 +81,8 @@ inline constexpr std::size_t kMaximumBlobsDescribed = 1024;
 /// The signature in the bytes of a superblob, or of the area reserved for one.
 SignatureDescription describeSignature(const foundation::SharedBytes& area);
 
-CodeDescription describeCode(const std::string& path, const CodeAccess& access);
-
-/// Handles bundles like the service of makeCodeSigningService().
-CodeDescription describeCode(const std::string& path);
+/// By default it handles bundles like the service of makeCodeSigningService().
+CodeDescription describeCode(const std::string& path, const CodeAccess& access = accessThrough(
+                                                          std::make_shared<foundation::Places>()));
 
 }  // namespace pinwell::codesign

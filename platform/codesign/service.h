@@ -5,6 +5,11 @@
 
 namespace pinwell::codesign {
 
+/// Maximum depth and number of directory entries of a walk. The largest real bundles have some 100000 files,
+/// and a framework in a plug-in in an application is some 20 directories deep.
+inline constexpr unsigned kMaximumBundleDepth = 64;
+inline constexpr std::size_t kMaximumBundleEntries = 1'000'000;
+
 class FileCodeSigningService final : public CodeSigningService {
   public:
     explicit FileCodeSigningService(CodeAccess access) : access_(std::move(access)) {}

@@ -3,6 +3,7 @@
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
 #include "codesign/superblob.h"
+#include "foundation/bundle.h"
 
 namespace pinwell::codesign {
 
@@ -31,6 +32,12 @@ Data DiskImageTrailer::canonicalBytes() const {
     UDIFFileHeader canonical = header_;
     canonical.setCodeSign(0, 0);
     return foundation::toData(canonical.bytes());
+}
+
+CodeAccess accessThrough(std::shared_ptr<foundation::Places> places) {
+    return {std::move(places), [](foundation::Places& all, const std::string& path) {
+                return foundation::mainExecutableOfBundle(all, path);
+            }};
 }
 
 namespace {

@@ -71,6 +71,9 @@ struct CodeAccess {
     MainExecutableFinder finder;
 };
 
+/// Access through `places`, with the bundles' main executables.
+CodeAccess accessThrough(std::shared_ptr<foundation::Places> places);
+
 enum class CodeKind { executableImage, diskImage, opaqueFile, separatelySigned };
 
 /// The components of a signature in separate files, from their directory; `nullopt` if there is no code

@@ -1,6 +1,6 @@
 #include <filesystem>
 
-#include "codesign/nested_code.h"
+#include "codesign/service.h"
 #include "service_fixture.h"
 #include "support/disk_image_builder.h"
 
