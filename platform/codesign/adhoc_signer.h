@@ -17,7 +17,7 @@
 // | then        | SHA-256 of the file's bytes from 0 to the limit                           |
 //
 // The limit is the file's size; for a disk image, the start of its signature or of its trailer
-// (disk_image_trailer.h).
+// (static_code.h).
 //
 // The signature is a superblob with this code directory, the empty requirements and an empty CMS blob.
 #pragma once

@@ -12,6 +12,13 @@
 // versions other than 1, 3, 4 and 5 (of a signer: 1 and 3), more than kMaximumDigestAlgorithms, more or fewer
 // than one signer, more than kMaximumCertificates, and a message with more than ber::kMaximumHeaders headers
 // to read. There is no limit on its length.
+//
+// The content of a time-stamp token (RFC 3161, 2.4.2):
+//
+//   TSTInfo = { version 1, policy, { digest algorithm, imprint }, serial number, time, accuracy, ordering,
+//               nonce, [0] authority, [1] extensions }
+//
+// The time is a GeneralizedTime in UTC: YYYYMMDDHHMMSS, a fraction of a second or none, Z.
 #pragma once
 
 #include <cstdint>
@@ -81,13 +88,6 @@ Algorithm readAlgorithm(ber::Reader& reader, ber::Work& work, const char* what);
 /// Whether `attributes` has an attribute of another type. Throws CodeError if any is
 /// malformed.
 bool hasAttributeBeside(const ber::Element& attributes, foundation::ByteView type, const char* what);
-
-// The content of a time-stamp token (RFC 3161, 2.4.2):
-//
-//   TSTInfo = { version 1, policy, { digest algorithm, imprint }, serial number, time, accuracy, ordering,
-//               nonce, [0] authority, [1] extensions }
-//
-// The time is a GeneralizedTime in UTC: YYYYMMDDHHMMSS, a fraction of a second or none, Z.
 
 /// The views refer to the parsed bytes.
 struct TimeStamp {

@@ -21,6 +21,8 @@ using ber::Work;
 using foundation::asBytes;
 using foundation::ByteView;
 using foundation::Data;
+using foundation::Date;
+using trust::ErrorQueueGuard;
 using trust::unsignedBytes;
 
 namespace {
@@ -185,8 +187,8 @@ void setPss(EVP_PKEY_CTX* context, const EVP_MD* digest, ByteView parameters) {
         refuse("the signature's algorithm does not fit the signer's key");
 }
 
-}  // namespace
-
+/// The digest of `bytes` by the algorithm's identifier: MD5, SHA-1, or one of the families SHA-2 and SHA-3;
+/// nullopt for others.
 std::optional<Data> messageDigest(const Algorithm& algorithm, ByteView bytes) {
     const EVP_MD* const digest = digestNamed(algorithm.identifier);
     if (digest == nullptr) return std::nullopt;
@@ -197,6 +199,10 @@ std::optional<Data> messageDigest(const Algorithm& algorithm, ByteView bytes) {
     return foundation::toData(std::as_bytes(std::span(value)).first(length));
 }
 
+/// Verifies `signature` over `bytes` with a SubjectPublicKeyInfo. The digest is the signer's
+/// `digestAlgorithm`; the signature algorithm's digest is ignored, except that RSASSA-PSS must name the same.
+/// Throws CodeError if the key is neither RSA (within kMaximumRsaBits) nor EC, if the signature algorithm
+/// does not fit the key, or if the signature does not verify.
 void requireSignature(ByteView publicKey, const Algorithm& digestAlgorithm,
                       const Algorithm& signatureAlgorithm, ByteView signature, ByteView bytes) {
     const KeySort sort = requireKeyWithinBounds(publicKey);
@@ -219,11 +225,6 @@ void requireSignature(ByteView publicKey, const Algorithm& digestAlgorithm,
                          bytes.size()) != 1)
         refuse("the signer's signature does not verify");
 }
-
-using foundation::Date;
-using trust::ErrorQueueGuard;
-
-namespace {
 
 using Name = foundation::Handle<X509_NAME, X509_NAME_free>;
 

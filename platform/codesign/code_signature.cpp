@@ -4,7 +4,6 @@
 
 #include "codesign/cms_signature.h"
 #include "codesign/code_error.h"
-#include "codesign/static_code.h"
 #include "codesign/superblob.h"
 #include "foundation/byte_reader.h"
 

@@ -28,12 +28,7 @@
 
 namespace pinwell::codesign {
 
-// The trailer of a disk image (formats/udif_header.h), as far as its signature needs it.
-
-/// The special slot of a code directory that covers the trailer.
-inline constexpr std::uint32_t kSlotTrailer = 6;
-
-/// A disk image's trailer. A value.
+/// A disk image's trailer (formats/udif_header.h), as far as its signature needs it. A value.
 class DiskImageTrailer {
   public:
     /// The trailer at the end of `source`; `nullopt` if there is none. Throws CodeError only if the bytes

@@ -24,6 +24,7 @@ namespace pinwell::codesign {
 inline constexpr std::uint32_t kSlotCodeDirectory = 0;
 inline constexpr std::uint32_t kSlotRequirements = 2;
 inline constexpr std::uint32_t kSlotEntitlements = 5;
+inline constexpr std::uint32_t kSlotTrailer = 6;  // of a disk image; not in the superblob
 inline constexpr std::uint32_t kSlotDerEntitlements = 7;
 inline constexpr std::uint32_t kSlotFirstAlternate = 0x1000;
 inline constexpr std::uint32_t kSlotLastAlternate = 0x1004;
