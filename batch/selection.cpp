@@ -7,7 +7,7 @@
 #include <filesystem>
 #include <memory>
 
-#include "codesign/digest.h"
+#include "codesign/code_directory.h"
 #include "foundation/bytes.h"
 
 namespace pinwell::batch {

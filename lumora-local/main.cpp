@@ -11,6 +11,7 @@
 
 #include "companion/parse_errors.h"
 #include "companion/version.h"
+#include "crypto/crypto.h"
 #include "foundation/date.h"
 #include "foundation/format.h"
 #include "foundation/markup.h"
@@ -31,7 +32,6 @@
 #include "lumora-local/upkeep_verbs.h"
 #include "sandbox/sandbox.h"
 #include "src/confinement.h"
-#include "trust/openssl.h"
 
 namespace {
 
@@ -401,7 +401,7 @@ int run(int argc, char** argv) {
 }  // namespace
 
 int main(int argc, char** argv) {
-    trust::wipeWhatOpenSSLFrees();
+    crypto::wipeWhatOpenSSLFrees();
     foundation::occupyStandardStreams();
     sandbox::forbidCoreDumps();  // they would contain the keys
     // A client that has gone away is an error of one write, not the end of the service.

@@ -1,26 +1,15 @@
 #include "lumora-local/sha256.h"
 
-#include "lumora-local/openssl_handles.h"
+#include "crypto/crypto.h"
 
 namespace pinwell::lumora {
 
-namespace {
-
-foundation::Data digestOf(foundation::ByteView bytes, const EVP_MD* algorithm, std::size_t length) {
-    foundation::Data digest(length);
-    require(EVP_Digest(bytes.data(), bytes.size(), octets(digest), nullptr, algorithm, nullptr) == 1,
-            "compute a digest");
-    return digest;
-}
-
-}  // namespace
-
 foundation::Data sha256(foundation::ByteView bytes) {
-    return digestOf(bytes, EVP_sha256(), 32);
+    return crypto::digestOf(crypto::Digest::sha256, bytes);
 }
 
 foundation::Data sha1(foundation::ByteView bytes) {
-    return digestOf(bytes, EVP_sha1(), 20);
+    return crypto::digestOf(crypto::Digest::sha1, bytes);
 }
 
 }  // namespace pinwell::lumora

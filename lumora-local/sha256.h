@@ -5,7 +5,7 @@
 
 namespace pinwell::lumora {
 
-/// 32 bytes. Throws Failure when the cryptographic library fails.
+/// 32 bytes. Throws std::bad_alloc if the cryptographic library fails.
 foundation::Data sha256(foundation::ByteView bytes);
 
 /// 20 bytes. Throws as sha256().

@@ -5,7 +5,7 @@
 #include <random>
 #include <utility>
 
-#include "codesign/digest.h"
+#include "codesign/code_directory.h"
 #include "foundation/base64.h"
 #include "foundation/format.h"
 #include "foundation/json.h"

@@ -10,6 +10,7 @@
 #include <utility>
 
 #include "companion/command_line.h"
+#include "crypto/crypto.h"
 #include "foundation/process.h"
 #include "foundation/utf8.h"
 #include "https/client_identity.h"
@@ -20,7 +21,6 @@
 #include "src/host_platform.h"
 #include "src/messages.h"
 #include "ticket/commands.h"
-#include "trust/openssl.h"
 
 namespace {
 
@@ -252,7 +252,7 @@ int run(int argc, char** argv) {
 
 int main(int argc, char** argv) {
     mallopt(M_ARENA_MAX, 1);
-    trust::wipeWhatOpenSSLFrees();
+    crypto::wipeWhatOpenSSLFrees();
     foundation::occupyStandardStreams();
     // A reader that has gone away, and a file that would grow beyond the caller's limit, are failed writes.
     std::signal(SIGPIPE, SIG_IGN);

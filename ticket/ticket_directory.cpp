@@ -6,7 +6,7 @@
 #include <cerrno>
 #include <ctime>
 
-#include "codesign/digest.h"
+#include "codesign/code_directory.h"
 #include "foundation/format.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "ticket/artefact.h"

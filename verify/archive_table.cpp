@@ -258,7 +258,7 @@ class ArchiveTableReader::Document final : public foundation::XMLEvents {
         if (!range) {
             data.problem = "the table does not say once where it is";
         } else if (!described_.checksum || !described_.algorithm ||
-                   described_.checksum->size() != digestLength(*described_.algorithm)) {
+                   described_.checksum->size() != crypto::digestSize(*described_.algorithm)) {
             data.problem = "the table has no checksum of it";
         }
         data.range = range.value_or(FileRange());

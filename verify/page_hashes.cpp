@@ -109,7 +109,7 @@ class PageCheck {
     };
 
     void checkPart(const Directory& directory, std::uint64_t begin, ByteView bytes) {
-        PageDigest& digest = threadDigest(algorithmOf(directory.content.digestType()));
+        crypto::Hasher& digest = crypto::threadHasher(algorithmOf(directory.content.digestType()));
         const std::size_t size = std::size_t{1} << directory.pageShift;
         auto page = static_cast<std::uint32_t>(begin >> directory.pageShift);
         for (std::size_t at = 0; at < bytes.size(); at += size, ++page) {

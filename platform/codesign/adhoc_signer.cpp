@@ -25,10 +25,10 @@ Data emptyRequirements() {
 }
 
 Data digestOfContent(const ByteSource& source, std::uint64_t limit) {
-    Hasher hasher(DigestType::sha256);
+    crypto::Hasher hasher(crypto::Digest::sha256);
     ReadAhead content(source, limit);
     for (ByteView piece = content.next(); !piece.empty(); piece = content.next()) hasher.update(piece);
-    return hasher.finish();
+    return foundation::toData(hasher.finish());
 }
 
 }  // namespace

@@ -11,19 +11,19 @@
 
 #include "codesign/cms_message.h"
 #include "codesign/code_error.h"
+#include "crypto/openssl.h"
 #include "foundation/handle.h"
-#include "trust/openssl.h"
 
 namespace pinwell::codesign {
 
 using ber::Reader;
 using ber::Work;
+using crypto::ErrorQueueGuard;
+using crypto::unsignedBytes;
 using foundation::asBytes;
 using foundation::ByteView;
 using foundation::Data;
 using foundation::Date;
-using trust::ErrorQueueGuard;
-using trust::unsignedBytes;
 
 namespace {
 

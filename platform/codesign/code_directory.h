@@ -35,11 +35,13 @@
 #include <optional>
 #include <string>
 
-#include "codesign/digest.h"
+#include "codesign/code_signing.h"
+#include "crypto/crypto.h"
 #include "foundation/sparse_bytes.h"
 
 namespace pinwell::codesign {
 
+using foundation::ByteView;
 using foundation::SharedBytes;
 
 inline constexpr std::uint32_t kCodeDirectoryMagic = 0xFADE0C02;
@@ -50,6 +52,33 @@ inline constexpr std::uint32_t kVersionWithTeam = 0x20200;
 inline constexpr std::uint32_t kVersionWithLimit64 = 0x20300;
 inline constexpr std::uint32_t kVersionWithExecutableSegment = 0x20400;
 inline constexpr std::uint32_t kVersionWithRuntime = 0x20500;
+
+// The digests of code directories:
+//
+// | Type | Digest           | Size in a code directory | Size of the cdhash |
+// |------|------------------|--------------------------|--------------------|
+// | 1    | SHA-1            | 20                       | 20                 |
+// | 2    | SHA-256          | 32                       | 20                 |
+// | 3    | SHA-256, cut     | 20                       | 20                 |
+// | 4    | SHA-384          | 48                       | 48                 |
+
+/// The type with this number; `nullopt` for an unknown number.
+std::optional<DigestType> digestTypeNumbered(std::uint8_t number);
+
+/// The digest that it is, or that it is cut from.
+crypto::Digest algorithmOf(DigestType type);
+
+/// Bytes that a digest of this type takes in a code directory.
+std::size_t digestSize(DigestType type);
+
+/// Bytes of the cdhash of a code directory of this type; the ticket payload uses the same sizes.
+std::size_t codeHashSize(DigestType type);
+
+/// The rank of a type for choosing the strongest code directory; the highest wins.
+int digestStrength(DigestType type);
+
+/// digestSize() bytes.
+Data digest(DigestType type, ByteView bytes);
 
 /// One for each slot that may hold one.
 inline constexpr std::size_t kMaximumCodeDirectories = 6;

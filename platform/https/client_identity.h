@@ -14,7 +14,7 @@ inline constexpr std::size_t kMaximumIdentityCertificates = std::size_t{256} * 1
 inline constexpr std::size_t kMaximumIdentityKey = std::size_t{64} * 1024;
 
 /// Immutable, shared. The key's memory is wiped with the last reference, if OpenSSL wipes freed memory
-/// (trust/openssl.h).
+/// (crypto/crypto.h).
 class ClientIdentity {
   public:
     /// Reads two PEM files: the certificate, optionally followed by its issuers', and its unencrypted private

@@ -1,11 +1,10 @@
 #include "trust/certificate.h"
 
 #include <algorithm>
-#include <array>
 
+#include "crypto/crypto.h"
 #include "foundation/description.h"
 #include "trust/der.h"
-#include "trust/openssl.h"
 
 namespace pinwell::trust {
 
@@ -93,11 +92,7 @@ std::string keyIdentifier(ByteView subjectKey, const CertificateExtensions& exte
     der::Cursor cursor(subjectKey);
     cursor.take(der::kConstructedSequence);
     const ByteView bits = der::wholeBytes(cursor.take(der::kBitString).contents);
-    const ErrorQueueGuard guard;
-    std::array<unsigned char, EVP_MAX_MD_SIZE> digest{};
-    unsigned length = 0;
-    if (EVP_Digest(bits.data(), bits.size(), digest.data(), &length, EVP_sha1(), nullptr) != 1) return {};
-    return foundation::toHex(byteView(digest.data(), static_cast<int>(length)));
+    return foundation::toHex(crypto::availableDigestOf(crypto::Digest::sha1, bits).value_or(Data()));
 }
 
 }  // namespace

@@ -1,13 +1,15 @@
 #include "trust/certificate_description.h"
 
 #include <algorithm>
-#include <array>
 
+#include "crypto/crypto.h"
+#include "crypto/openssl.h"
 #include "trust/certificate.h"
-#include "trust/openssl.h"
 
 namespace pinwell::trust {
 namespace {
+
+using crypto::Handle;
 
 using BioHandle = Handle<BIO, BIO_free_all>;
 using NameHandle = Handle<X509_NAME, X509_NAME_free>;
@@ -15,7 +17,7 @@ using ObjectHandle = Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
 
 /// The text of a name that `readName` accepts, so its parts are well-formed and bounded in number.
 std::string nameText(const der::Element& encoded) {
-    const unsigned char* at = unsignedBytes(encoded.whole);
+    const unsigned char* at = crypto::unsignedBytes(encoded.whole);
     const NameHandle name(d2i_X509_NAME(nullptr, &at, static_cast<long>(encoded.whole.size())));
     const BioHandle text(BIO_new(BIO_s_mem()));
     // UTF-8 stays readable; terminal control characters are escaped.
@@ -47,13 +49,6 @@ std::string serialText(foundation::ByteView number) {
         std::find_if(magnitude.begin(), magnitude.end(), [](std::byte byte) { return byte != std::byte{0}; });
     if (first == magnitude.end()) return "00";
     return (isNegative ? "-" : "") + foundation::toHex({first, magnitude.end()});
-}
-
-foundation::Data fingerprint(foundation::ByteView der, const EVP_MD* digest) {
-    std::array<unsigned char, EVP_MAX_MD_SIZE> bytes{};
-    unsigned length = 0;
-    if (EVP_Digest(der.data(), der.size(), bytes.data(), &length, digest, nullptr) != 1) return {};
-    return foundation::toData(byteView(bytes.data(), static_cast<int>(length)));
 }
 
 /// OpenSSL's long name of an identifier, of bounded length; the identifier itself if it has none.
@@ -93,7 +88,7 @@ void describeExtensions(const CertificateExtensions& extensions, CertificateDesc
 std::optional<CertificateDescription> describeCertificate(foundation::ByteView der) {
     const X509CertificateRef certificate = X509Certificate::parse(der);
     if (certificate == nullptr) return std::nullopt;
-    const ErrorQueueGuard guard;
+    const crypto::ErrorQueueGuard guard;
     const CertificateParts& parts = certificate->parts();
     CertificateDescription description;
     description.subject = nameText(parts.subject);
@@ -106,8 +101,10 @@ std::optional<CertificateDescription> describeCertificate(foundation::ByteView d
     description.signatureAlgorithm = oidName(certificate->signatureAlgorithm().oid);
     description.isSelfIssued = certificate->isSelfIssued();
     describeExtensions(certificate->extensions(), description);
-    description.sha1Fingerprint = fingerprint(der, EVP_sha1());
-    description.sha256Fingerprint = fingerprint(der, EVP_sha256());
+    description.sha1Fingerprint =
+        crypto::availableDigestOf(crypto::Digest::sha1, der).value_or(foundation::Data());
+    description.sha256Fingerprint =
+        crypto::availableDigestOf(crypto::Digest::sha256, der).value_or(foundation::Data());
     return description;
 }
 

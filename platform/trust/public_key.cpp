@@ -6,13 +6,17 @@
 
 #include <algorithm>
 
+#include "crypto/openssl.h"
 #include "foundation/byte_reader.h"
 #include "trust/der.h"
-#include "trust/openssl.h"
 
 namespace pinwell::trust {
 
 namespace {
+
+using crypto::ErrorQueueGuard;
+using crypto::Handle;
+using crypto::unsignedBytes;
 
 using DigestContext = Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
 

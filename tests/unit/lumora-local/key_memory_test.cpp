@@ -12,6 +12,7 @@
 #include <string>
 #include <vector>
 
+#include "crypto/crypto.h"
 #include "fixed_now.h"
 #include "foundation/file_io.h"
 #include "foundation/sanitized.h"
@@ -20,13 +21,12 @@
 #include "lumora-local/ticket_maker.h"
 #include "lumora-local/tls_context.h"
 #include "support/temporary_directory.h"
-#include "trust/openssl.h"
 
 namespace pinwell::lumora {
 namespace {
 
 // Before main, because nothing has used the library at that time.
-const bool wipes = trust::wipeWhatOpenSSLFrees();
+const bool wipes = crypto::wipeWhatOpenSSLFrees();
 
 // A text to search for, stored so that the search does not find its own copy.
 using Needle = std::vector<std::uint8_t>;

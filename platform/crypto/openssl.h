@@ -1,4 +1,4 @@
-// Shared by the .cpp files that use OpenSSL, here and in codesign. Do not include it in a header.
+// Shared by the .cpp files that use OpenSSL. Do not include it in a header.
 #pragma once
 
 #include <openssl/asn1.h>
@@ -11,7 +11,7 @@
 #include "foundation/bytes.h"
 #include "foundation/handle.h"
 
-namespace pinwell::trust {
+namespace pinwell::crypto {
 
 using foundation::Handle;
 
@@ -39,8 +39,4 @@ inline foundation::ByteView byteView(const ASN1_STRING* string) {
     return byteView(ASN1_STRING_get0_data(string), ASN1_STRING_length(string));
 }
 
-/// Makes OpenSSL wipe all memory that it frees; by default it wipes only some copies of a key. Call it before
-/// OpenSSL allocates, first in main; returns false if it is too late.
-bool wipeWhatOpenSSLFrees() noexcept;
-
-}  // namespace pinwell::trust
+}  // namespace pinwell::crypto
