@@ -7,7 +7,7 @@
 #include <string>
 
 #include "batch/report.h"
-#include "retrieval/answer.h"
+#include "retrieval/record_service.h"
 #include "retrieval/artefact_run.h"
 #include "retrieval/retry_policy.h"
 

@@ -25,7 +25,7 @@
 #include "batch/selection.h"
 #include "foundation/error.h"
 #include "foundation/file_io.h"
-#include "retrieval/cause.h"
+#include "retrieval/report.h"
 
 namespace pinwell::batch {
 

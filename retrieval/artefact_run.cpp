@@ -1,11 +1,12 @@
 #include "retrieval/artefact_run.h"
 
+#include <sys/stat.h>
+
 #include <cerrno>
 #include <utility>
 
 #include "foundation/process.h"
 #include "foundation/url.h"
-#include "retrieval/file_state.h"
 #include "src/DownloadDelegate.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
@@ -115,6 +116,22 @@ Cause causeWithoutLookup(int status, PWHashedFile& file) {
     }
 }
 
+std::string textOf(const timespec& time) {
+    return std::to_string(time.tv_sec) + "." + std::to_string(time.tv_nsec);
+}
+
+// "SIZE,MODIFIED,CHANGED,INODE" of the file, without following a link; both times are SECONDS.NANOSECONDS
+// since the epoch. Empty if the file does not exist, or stat fails.
+//
+// Programs cannot set the time of change. So changed contents are detected even if length and modification
+// time were restored. A file that was copied, moved to another volume or unpacked again has another state.
+std::string stateOfFile(const std::string& path) {
+    struct stat status {};
+    if (::lstat(path.c_str(), &status) != 0) return {};
+    return std::to_string(status.st_size) + "," + textOf(status.st_mtim) + "," + textOf(status.st_ctim) +
+           "," + std::to_string(status.st_ino);
+}
+
 }  // namespace
 
 bool isPath(const std::string& text) noexcept {
@@ -134,20 +151,6 @@ struct ArtefactRun::Reading {
     std::optional<files::ItemState> executableState;
     std::string executableText;  // its state, as a text
 };
-
-std::string_view nameOf(Kind kind) noexcept {
-    switch (kind) {
-        case Kind::none:
-            return "";
-        case Kind::bundle:
-            return "bundle";
-        case Kind::diskImage:
-            return "diskImage";
-        case Kind::package:
-            return "package";
-    }
-    return "";
-}
 
 Kind kindOf(const PWHashedFile& file) {
     if (dynamic_cast<const PWHashedBundle*>(&file) != nullptr) return Kind::bundle;

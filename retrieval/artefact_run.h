@@ -15,28 +15,15 @@
 #include <memory>
 #include <optional>
 #include <string>
-#include <string_view>
 #include <vector>
 
 #include "foundation/bytes.h"
-#include "retrieval/answer.h"
-#include "retrieval/cause.h"
+#include "retrieval/record_service.h"
+#include "retrieval/report.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/platform.h"
 
 namespace pinwell::retrieval {
-
-/// The result of an artefact.
-struct Outcome {
-    int exitStatus = 0;
-    Cause cause = Cause::worked;
-};
-
-/// The kind of an artefact; `none` if not yet known, or unsupported.
-enum class Kind : std::uint8_t { none, bundle, diskImage, package };
-
-/// "bundle", "diskImage", "package"; empty for `none`.
-std::string_view nameOf(Kind kind) noexcept;
 
 Kind kindOf(const PWHashedFile& file);
 
@@ -76,8 +63,8 @@ class ArtefactRun {
     Kind kind() const noexcept { return kind_; }
 
     /// The state of the artefact's executable and of the file that carries the ticket, to detect later
-    /// changes: a text without blanks (file_state.h). The state before reading; after a successful staple,
-    /// the state after writing. Empty if unknown.
+    /// changes: a text without blanks. The state before reading; after a successful staple, the state after
+    /// writing. Empty if unknown.
     const std::string& filesState() const noexcept { return filesState_; }
 
     /// The lines that `pinwell` would print.

@@ -1,4 +1,4 @@
-// One HTTPS session to the record service. One thread at a time uses it; any thread may end it.
+// Connections to the record service, and how calls that use them are cancelled.
 #pragma once
 
 #include <memory>
@@ -24,6 +24,7 @@ struct Exchange {
     std::vector<std::string> messages = {};  // from the server's judgement
 };
 
+/// One HTTPS session to the record service. One thread at a time uses it; any thread may end it.
 class Connection : public https::SessionDelegate {
   public:
     explicit Connection(const Platform& platform) : platform_(platform) {}
@@ -51,6 +52,41 @@ class Connection : public https::SessionDelegate {
     mutable std::mutex mutex_;
     bool cancelled_ = false;
     std::shared_ptr<https::Session> session_;  // last: it uses all of the above
+};
+
+/// Ends calls before their time. May be shared by several calls, and used from any thread.
+class Cancellation {
+  public:
+    Cancellation();
+    ~Cancellation();
+    Cancellation(const Cancellation&) = delete;
+    Cancellation& operator=(const Cancellation&) = delete;
+
+    /// Running calls end soon, with errors; later calls end at once.
+    void cancel();
+    bool isCancelled() const;
+
+    /// Sleeps until `end`. Returns true, possibly earlier, if it is cancelled.
+    bool sleepUntil(Clock::time_point end) const;
+
+    class Use;
+
+  private:
+    struct State;
+    std::shared_ptr<State> state_;
+};
+
+/// While it lives, cancel() cancels the connection. The connection must outlive it.
+class Cancellation::Use {
+  public:
+    Use(const Cancellation& cancellation, Connection& connection);
+    ~Use();
+    Use(const Use&) = delete;
+    Use& operator=(const Use&) = delete;
+
+  private:
+    const std::shared_ptr<State> state_;
+    Connection& connection_;
 };
 
 }  // namespace pinwell::retrieval

@@ -14,8 +14,6 @@
 #include "foundation/process.h"
 #include "foundation/url.h"
 #include "foundation/value.h"
-#include "retrieval/connection.h"
-#include "retrieval/exchange_failure.h"
 #include "src/ticket_record.h"
 
 namespace pinwell::retrieval {
@@ -73,6 +71,35 @@ Answer answerOf(const Exchange& exchange, foundation::Data body) {
     return answer;
 }
 
+foundation::Error busyError(const https::HTTPResponse& response) {
+    return {foundation::kURLErrorDomain, static_cast<std::int64_t>(https::URLErrorCode::badServerResponse),
+            "The host \"" + response.url.host() + "\" answered with status " +
+                std::to_string(response.status) + " (" +
+                https::localizedStringForStatusCode(response.status) + ")."};
+}
+
+// Returns `nullopt` if there is a response with a body, and its status is not a busy one. Otherwise returns
+// the failure as an answer, which is not `answered`.
+std::optional<Answer> failureOf(const Exchange& exchange) {
+    Answer answer;
+    answer.messages = exchange.messages;
+    if (exchange.error) {
+        answer.kind = exchange.serverWasRefused ? Answer::Kind::untrusted : Answer::Kind::unreachable;
+        answer.error = exchange.error;
+        return answer;
+    }
+    if (exchange.response && isBusyStatus(exchange.response->status)) {
+        answer.retryAfter = retryAfterOf(*exchange.response);
+        answer.error = busyError(*exchange.response);
+        return answer;
+    }
+    if (exchange.body.empty()) {
+        answer.response = exchange.response;
+        return answer;
+    }
+    return std::nullopt;
+}
+
 // The limits that end a call early.
 struct Limits {
     const Cancellation& cancellation;
@@ -119,6 +146,19 @@ std::optional<https::Request> assetRequest(const foundation::Data& body) {
 }
 
 }  // namespace
+
+bool Answer::hasNoTicket() const {
+    if (kind != Kind::answered || body.empty()) return false;
+    const auto document = foundation::parseJSON(body);
+    try {
+        const TicketRecord record = ticketRecordOf(document ? *document : foundation::Value());
+        return record.ticketText() == nullptr && record.assetURLTemplate() == nullptr;
+    } catch (const foundation::ValueTypeError&) {
+        return false;
+    } catch (const std::out_of_range&) {
+        return false;
+    }
+}
 
 class RecordService::Impl {
   public:

@@ -6,13 +6,16 @@
 // retries (retry_policy.h, ticket_fetch.h).
 #pragma once
 
+#include <chrono>
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
 #include <vector>
 
-#include "retrieval/answer.h"
-#include "retrieval/cancellation.h"
+#include "foundation/bytes.h"
+#include "https/session.h"
+#include "retrieval/connection.h"
 #include "retrieval/retry_policy.h"
 #include "src/platform.h"
 
@@ -23,6 +26,40 @@ inline constexpr std::size_t kNamesPerRequest = 200;
 
 /// The maximum number of connections of one call.
 inline constexpr std::size_t kConnectionsPerCall = 4;
+
+/// The result of one try to get a record's ticket.
+struct Answer {
+    enum class Kind : std::uint8_t {
+        answered,     // there is a response, with or without a ticket
+        unreachable,  // a retry may help; there is an error, or a response without a body
+        untrusted,    // there is an error: the server was refused
+    };
+    Kind kind = Kind::unreachable;
+
+    /// The response as if this record alone had been looked up; set if the outcome is `answered`. Its request
+    /// identifier is the service's with a number of ours, so that it is unique in the process.
+    std::optional<https::HTTPResponse> response;
+    foundation::Data body;
+
+    /// The file that the record names instead of a ticket; `nullopt` if it names none, or its URL is invalid.
+    struct Asset {
+        https::HTTPResponse response;
+        foundation::Data contents;
+    };
+    std::optional<Asset> asset;
+
+    std::optional<foundation::Error> error;
+    bool errorIsOfAsset = false;  // the lookup succeeded, the asset's download failed
+
+    /// The delay that the service asks for.
+    std::optional<std::chrono::seconds> retryAfter;
+
+    /// The messages of the server's judgement, for the user.
+    std::vector<std::string> messages;
+
+    /// Whether the service responded that there is no ticket.
+    bool hasNoTicket() const;
+};
 
 class RecordService {
   public:

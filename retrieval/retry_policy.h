@@ -1,9 +1,11 @@
-// The policy of retries.
+// When a request is repeated, and after which delay.
 #pragma once
 
 #include <chrono>
 #include <cstdint>
 #include <optional>
+
+#include "https/session.h"
 
 namespace pinwell::retrieval {
 
@@ -37,5 +39,12 @@ struct RetryPolicy {
 
 /// From 0 to 1, from any thread.
 double randomChance();
+
+/// Whether a response of this status asks for a later retry: the ones of a gateway or an overloaded service
+/// (429, 502, 503, 504). They say nothing about the request.
+bool isBusyStatus(int status);
+
+/// The delay that the response asks for (RFC 9110, section 10.2.3); `nullopt` if it names none.
+std::optional<std::chrono::seconds> retryAfterOf(const https::HTTPResponse& response);
 
 }  // namespace pinwell::retrieval

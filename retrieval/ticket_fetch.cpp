@@ -2,14 +2,15 @@
 
 #include <algorithm>
 #include <map>
+#include <stdexcept>
 #include <utility>
 
 #include "foundation/base64.h"
 #include "foundation/hex.h"
 #include "foundation/json.h"
 #include "foundation/value.h"
-#include "retrieval/refused_ticket.h"
 #include "src/PWHashedFile/PWHashedFile.h"
+#include "src/explain_ticket.h"
 #include "src/messages.h"
 #include "src/ticket_record.h"
 #include "src/ticket_verdict.h"
@@ -30,91 +31,73 @@ struct Pending {
     std::optional<Clock::time_point> notIssuedSince;
 };
 
-void fail(FetchedTicket& result, Cause cause, int status, std::string message) {
-    result.cause = cause;
-    result.exitStatus = status;
-    result.messages.push_back(std::move(message));
+// Returns false, and ends the result, if the asset is not the one that the record announces.
+bool isAnnounced(const Answer::Asset& asset, const TicketRecord& record, FetchedTicket& result) {
+    switch (faultOfAsset(record.assetSize, asset.contents.size(), asset.response)) {
+        case AssetFault::length:
+            result.end(
+                Cause::notAcceptable, kExitDataError,
+                foundation::format("We were expecting a ticket size of %@ but download a ticket of size %lu",
+                                   record.assetSize, asset.contents.size()));
+            return false;
+        case AssetFault::status:
+            result.end(Cause::unreachable, kExitNoHost,
+                       foundation::format("Attempting to download larger ticket for %@ failed. %@",
+                                          result.recordName,
+                                          https::localizedStringForStatusCode(asset.response.status)));
+            return false;
+        case AssetFault::none:
+            break;
+    }
+    return true;
 }
 
-// Takes the ticket from a response.
-void takeTicket(const Answer& answer, FetchedTicket& result, const Platform& platform) {
+// Takes the ticket from a record. Throws as ticketRecordOf() if the response has another form.
+void takeTicket(const Answer& answer, FetchedTicket& result, trust::TrustService& trust) {
     const auto document = foundation::parseJSON(answer.body);
+    const TicketRecord record = ticketRecordOf(document ? *document : foundation::Value());
     std::optional<foundation::Data> ticket;
-    try {
-        const TicketRecord record = ticketRecordOf(document ? *document : foundation::Value());
-        if (const std::string* const text = record.ticketText()) {
-            ticket = foundation::decodeBase64(*text);
-        } else if (record.assetURLTemplate() == nullptr) {
-            fail(result, Cause::notIssued, kExitDataError,
-                 foundation::format("Lumora query for %@ failed due to \"%@\".", result.recordName,
-                                    record.reason));
-            return;
-        } else if (answer.asset) {
-            switch (faultOfAsset(record.assetSize, answer.asset->contents.size(), answer.asset->response)) {
-                case AssetFault::length:
-                    fail(result, Cause::notAcceptable, kExitDataError,
-                         foundation::format(
-                             "We were expecting a ticket size of %@ but download a ticket of size %lu",
-                             record.assetSize, answer.asset->contents.size()));
-                    return;
-                case AssetFault::status:
-                    fail(result, Cause::unreachable, kExitNoHost,
-                         foundation::format(
-                             "Attempting to download larger ticket for %@ failed. %@", result.recordName,
-                             https::localizedStringForStatusCode(answer.asset->response.status)));
-                    return;
-                case AssetFault::none:
-                    break;
-            }
-            ticket = answer.asset->contents;
-        }
-    } catch (const foundation::ValueTypeError&) {
-        fail(result, Cause::notAcceptable, kExitDataError,
-             foundation::format("Lumora query for %@ did not return expected JSON data.", result.recordName));
-        return;
-    } catch (const std::out_of_range&) {
-        fail(result, Cause::notAcceptable, kExitDataError,
-             foundation::format("Lumora query for %@ did not return expected JSON data.", result.recordName));
-        return;
+    if (const std::string* const text = record.ticketText()) {
+        ticket = foundation::decodeBase64(*text);
+    } else if (record.assetURLTemplate() == nullptr) {
+        return result.end(Cause::notIssued, kExitDataError,
+                          foundation::format("Lumora query for %@ failed due to \"%@\".", result.recordName,
+                                             record.reason));
+    } else if (answer.asset) {
+        if (!isAnnounced(*answer.asset, record, result)) return;
+        ticket = answer.asset->contents;
     }
-    const auto hash = hashInRecordName(result.recordName);  // of a name that was looked up
-    switch (judgeTicket(
-        ticket, [&] { return hash; }, platform.trust)) {
-        case TicketVerdict::acceptable:
-            result.cause = Cause::worked;
-            result.exitStatus = kExitOK;
-            result.ticket = *std::move(ticket);
-            return;
-        case TicketVerdict::revoked:
-            fail(result, Cause::revoked, kExitNoPermission,
-                 foundation::format(
-                     "The ticket for %@ has been revoked. Tollmark will prevent it from running.",
-                     result.recordName));
-            result.ticket = *std::move(ticket);
-            return;
-        case TicketVerdict::refused:
-            fail(result, Cause::notAcceptable, kExitDataError,
-                 foundation::format("Could not validate ticket for %@: %@.", result.recordName,
-                                    ruleBrokenByTicket(ticket, {*hash}, platform.trust)));
-            return;
-    }
+    // The name was looked up, so it holds a hash.
+    result.take(std::move(ticket), {*hashInRecordName(result.recordName)}, trust);
 }
 
-void takeAnswer(const Answer& answer, FetchedTicket& result, const Platform& platform) {
+void takeAnswer(const Answer& answer, FetchedTicket& result, trust::TrustService& trust) {
     ++result.attempts;
     result.messages = answer.messages;
     result.ticket.clear();
     if (answer.error) {
-        fail(result, answer.kind == Answer::Kind::untrusted ? Cause::untrusted : Cause::unreachable,
-             kExitNoHost, foundation::format("error is %@", answer.error));
+        result.end(answer.kind == Answer::Kind::untrusted ? Cause::untrusted : Cause::unreachable,
+                   kExitNoHost, foundation::format("error is %@", answer.error));
         return;
     }
     if (answer.body.empty()) {
-        fail(result, Cause::unreachable, kExitNoHost,
-             foundation::format("Lumora's response is inconsistent with expections: %@", answer.response));
+        result.end(
+            Cause::unreachable, kExitNoHost,
+            foundation::format("Lumora's response is inconsistent with expections: %@", answer.response));
         return;
     }
-    takeTicket(answer, result, platform);
+    const auto refuseForm = [&result] {
+        result.end(
+            Cause::notAcceptable, kExitDataError,
+            foundation::format("Lumora query for %@ did not return expected JSON data.", result.recordName));
+    };
+    try {
+        takeTicket(answer, result, trust);
+    } catch (const foundation::ValueTypeError&) {
+        refuseForm();
+    } catch (const std::out_of_range&) {
+        refuseForm();
+    }
 }
 
 class Fetch {
@@ -171,8 +154,8 @@ class Fetch {
                 group.push_back(std::move(fresh));
                 continue;
             }
-            fail(fresh.result, Cause::notIssued, kExitDataError,
-                 foundation::format("%@ is not the name of a record.", fresh.result.recordName));
+            fresh.result.end(Cause::notIssued, kExitDataError,
+                             foundation::format("%@ is not the name of a record.", fresh.result.recordName));
             end(fresh);
         }
         return group;
@@ -195,7 +178,7 @@ class Fetch {
     // The time of the next try; `nullopt` if it has ended.
     std::optional<Clock::time_point> takeAnswerOf(Pending& pending, const Answer& answer, double chance) {
         const auto now = Clock::now();
-        takeAnswer(answer, pending.result, platform_);
+        takeAnswer(answer, pending.result, platform_.trust);
         if (answer.error && (cancellation_.isCancelled() || isLate())) return now;  // run() says why
         if (isCurable(pending.result.cause) && pending.failures++ < options_.retry.retries)
             return now + options_.retry.delayAfter(pending.failures, answer.retryAfter, chance);
@@ -229,6 +212,41 @@ class Fetch {
 };
 
 }  // namespace
+
+void FetchedTicket::end(Cause itsCause, int itsStatus, std::string message) {
+    cause = itsCause;
+    exitStatus = itsStatus;
+    messages.push_back(std::move(message));
+}
+
+void FetchedTicket::take(std::optional<foundation::Data> received,
+                         const std::vector<foundation::Data>& hashes, trust::TrustService& trust) {
+    const auto own = [&] { return std::optional(hashes.front()); };  // found without sorting the list
+    switch (hashes.size() == 1 ? judgeTicket(received, own, trust) : judgeTicket(received, hashes, trust)) {
+        case TicketVerdict::acceptable:
+            cause = Cause::worked;
+            exitStatus = kExitOK;
+            break;
+        case TicketVerdict::revoked:
+            end(Cause::revoked, kExitNoPermission,
+                foundation::format(
+                    "The ticket for %@ has been revoked. Tollmark will prevent it from running.",
+                    recordName));
+            break;
+        case TicketVerdict::refused:
+            return end(Cause::notAcceptable, kExitDataError,
+                       foundation::format("Could not validate ticket for %@: %@.", recordName,
+                                          ruleBrokenByTicket(received, hashes, trust)));
+    }
+    ticket = *std::move(received);
+}
+
+std::string ruleBrokenByTicket(const std::optional<foundation::Data>& ticket,
+                               const std::vector<foundation::Data>& hashes, trust::TrustService& trust) {
+    if (!ticket) return "its text is not base64";
+    const auto refusal = explain_ticket(*ticket, hashes.front(), trust);
+    return refusal ? refusal->reason : "the ticket does not list every hash of the artefact";
+}
 
 std::optional<foundation::Data> hashInRecordName(std::string_view name) {
     if (name.starts_with("1/")) {

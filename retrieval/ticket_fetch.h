@@ -1,5 +1,5 @@
-// Fetches tickets by the names of their records, without any artefact. Each is judged; a missing one has its
-// cause.
+// Fetches tickets by the names of their records, without any artefact. Each ticket is judged; a missing one
+// has its cause.
 //
 //   const HostPlatform host(...);
 //   for (const FetchedTicket& one : fetchTickets({"2/2/0a1b..."}, {}, host.services()))
@@ -13,10 +13,11 @@
 #include <vector>
 
 #include "foundation/bytes.h"
-#include "retrieval/cause.h"
 #include "retrieval/record_service.h"
+#include "retrieval/report.h"
 #include "retrieval/retry_policy.h"
 #include "src/platform.h"
+#include "trust/trust.h"
 
 namespace pinwell::retrieval {
 
@@ -43,7 +44,19 @@ struct FetchedTicket {
 
     /// For the user: why there is no ticket.
     std::vector<std::string> messages;
+
+    /// Sets the cause and the exit status, and adds the message.
+    void end(Cause itsCause, int itsStatus, std::string message);
+
+    /// Judges a ticket, and ends as worked, revoked or notAcceptable. `received` is `nullopt` if its text is
+    /// not base64. `hashes` are the ones that the ticket must list, the artefact's own first; never empty.
+    void take(std::optional<foundation::Data> received, const std::vector<foundation::Data>& hashes,
+              trust::TrustService& trust);
 };
+
+/// The rule that a refused ticket breaks, without a full stop. The arguments are as in FetchedTicket::take.
+std::string ruleBrokenByTicket(const std::optional<foundation::Data>& ticket,
+                               const std::vector<foundation::Data>& hashes, trust::TrustService& trust);
 
 /// The hash in the name of a record: "2/ALGORITHM/HEX" or "1/HEX", the digits in lower case, 20 to 64 bytes
 /// of hash. `nullopt` for any other name.

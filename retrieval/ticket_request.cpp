@@ -10,12 +10,9 @@
 #include "foundation/format.h"
 #include "foundation/json.h"
 #include "foundation/value.h"
-#include "retrieval/exchange_failure.h"
-#include "retrieval/refused_ticket.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/messages.h"
 #include "src/record_name.h"
-#include "src/ticket_verdict.h"
 
 namespace pinwell::retrieval {
 namespace {
@@ -44,12 +41,6 @@ bool isCode(const foundation::Error& error, URLErrorCode code) {
 bool isLoss(const foundation::Error& error) {
     return std::any_of(kLosses.begin(), kLosses.end(),
                        [&error](URLErrorCode code) { return isCode(error, code); });
-}
-
-void finish(FetchedTicket& result, Cause cause, int status, std::string message) {
-    result.cause = cause;
-    result.exitStatus = status;
-    result.messages.push_back(std::move(message));
 }
 
 std::string nameOf(const CodeHash& hash) {
@@ -155,18 +146,17 @@ RequestedTicket TicketRequests::request(const TicketWish& wish) {
     }
     auto body = bodyOf(wish);
     if (!body) {
-        finish(
-            fetched, Cause::notIssued, kExitDataError,
+        fetched.end(
+            Cause::notIssued, kExitDataError,
             foundation::format("The request for %@ cannot be written: label or comment is not UTF-8.", name));
         return result;
     }
     const https::Request request = requestFor(options_.service, *std::move(body));
     for (unsigned failures = 1;; ++failures) {
-        std::optional<std::chrono::seconds> retryAfter;
-        const Try tried = attempt(wish, request, result, retryAfter);
+        const Try tried = attempt(wish, request, result);
         if (fetched.cause == Cause::unreachable && hasEnded(fetched)) break;
-        if (tried == Try::isDone || failures > options_.retry.retries) break;
-        auto due = Clock::now() + options_.retry.delayAfter(failures, retryAfter, randomChance());
+        if (!tried.mayBeRepeated || failures > options_.retry.retries) break;
+        auto due = Clock::now() + options_.retry.delayAfter(failures, tried.retryAfter, randomChance());
         if (options_.deadline) due = std::min(due, *options_.deadline);
         cancellation_.sleepUntil(due);
         if (hasEnded(fetched)) break;
@@ -190,59 +180,56 @@ bool TicketRequests::hasEnded(FetchedTicket& result) const {
 }
 
 TicketRequests::Try TicketRequests::attempt(const TicketWish& wish, const https::Request& request,
-                                            RequestedTicket& result,
-                                            std::optional<std::chrono::seconds>& retryAfter) {
+                                            RequestedTicket& result) {
     FetchedTicket& fetched = result.fetched;
     const Exchange exchange = connection_.exchange(request, options_.deadline);
     ++fetched.attempts;
     fetched.messages = exchange.messages;
     if (!exchange.error) {
         lost_.reset();
-        return takeResponse(wish, exchange, result, retryAfter);
+        return takeResponse(wish, exchange, result);
     }
-    finish(fetched, exchange.serverWasRefused ? Cause::untrusted : Cause::unreachable, kExitNoHost,
-           foundation::format("error is %@", exchange.error));
+    fetched.end(exchange.serverWasRefused ? Cause::untrusted : Cause::unreachable, kExitNoHost,
+                foundation::format("error is %@", exchange.error));
     const bool isLost = !exchange.serverWasRefused && isLoss(*exchange.error);
     if (isLost || exchange.serverWasRefused ||
         isCode(*exchange.error, URLErrorCode::secureConnectionFailed)) {
         lost_ = fetched;
         lost_->attempts = 0;
     }
-    return isLost ? Try::mayBeRepeated : Try::isDone;
+    return {isLost};
 }
 
 TicketRequests::Try TicketRequests::takeResponse(const TicketWish& wish, const Exchange& exchange,
-                                                 RequestedTicket& result,
-                                                 std::optional<std::chrono::seconds>& retryAfter) {
+                                                 RequestedTicket& result) const {
     FetchedTicket& fetched = result.fetched;
     const int status = exchange.response->status;
     if (status >= 200 && status < 300) {
         takeIssued(wish, exchange, result);
-        return Try::isDone;
+        return {};
     }
     const std::string problem = problemIn(exchange);
     if (status == kStatusConflict) {
-        finish(fetched, Cause::revoked, kExitNoPermission,
-               foundation::format("No ticket was issued for %@: %@", fetched.recordName, problem));
-        return Try::isDone;
+        fetched.end(Cause::revoked, kExitNoPermission,
+                    foundation::format("No ticket was issued for %@: %@", fetched.recordName, problem));
+        return {};
     }
     if (status >= 400 && status < 500 && status != kStatusRequestTimeout && !isBusyStatus(status)) {
-        finish(fetched, Cause::notIssued, kExitDataError,
-               foundation::format("No ticket was issued for %@: %@", fetched.recordName, problem));
-        return Try::isDone;
+        fetched.end(Cause::notIssued, kExitDataError,
+                    foundation::format("No ticket was issued for %@: %@", fetched.recordName, problem));
+        return {};
     }
-    finish(
-        fetched, Cause::unreachable, kExitNoHost,
+    fetched.end(
+        Cause::unreachable, kExitNoHost,
         foundation::format("The service cannot issue a ticket for %@ now: %@", fetched.recordName, problem));
-    retryAfter = retryAfterOf(*exchange.response);
-    return isBusyStatus(status) || status == kStatusRequestTimeout ? Try::mayBeRepeated : Try::isDone;
+    return {isBusyStatus(status) || status == kStatusRequestTimeout, retryAfterOf(*exchange.response)};
 }
 
 void TicketRequests::takeIssued(const TicketWish& wish, const Exchange& exchange,
                                 RequestedTicket& result) const {
     FetchedTicket& fetched = result.fetched;
     const auto refuse = [&fetched](std::string message) {
-        finish(fetched, Cause::notAcceptable, kExitDataError, std::move(message));
+        fetched.end(Cause::notAcceptable, kExitDataError, std::move(message));
     };
     const auto document = foundation::parseJSON(exchange.body);
     const Value issued = document && hasType(*exchange.response, "application/json") ? *document : Value();
@@ -257,25 +244,10 @@ void TicketRequests::takeIssued(const TicketWish& wish, const Exchange& exchange
     if (*record != fetched.recordName)
         return refuse(foundation::format("The service's answer for %@ is about another record, %@.",
                                          fetched.recordName, cutTo(kShownDetail, *record)));
-    auto ticket = foundation::decodeBase64(*text);
     std::vector<foundation::Data> hashes;
     for (const CodeHash& hash : wish.hashes) hashes.push_back(hash.hash);
-    switch (judgeTicket(ticket, hashes, platform_.trust)) {
-        case TicketVerdict::acceptable:
-            fetched.cause = Cause::worked;
-            fetched.exitStatus = kExitOK;
-            break;
-        case TicketVerdict::revoked:
-            finish(fetched, Cause::revoked, kExitNoPermission,
-                   foundation::format(
-                       "The ticket for %@ has been revoked. Tollmark will prevent it from running.",
-                       fetched.recordName));
-            break;
-        case TicketVerdict::refused:
-            return refuse(foundation::format("Could not validate ticket for %@: %@.", fetched.recordName,
-                                             ruleBrokenByTicket(ticket, hashes, platform_.trust)));
-    }
-    fetched.ticket = *std::move(ticket);
+    fetched.take(foundation::decodeBase64(*text), hashes, platform_.trust);
+    if (fetched.cause == Cause::notAcceptable) return;
     result.action = *action;
     result.event = *event;
 }

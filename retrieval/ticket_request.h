@@ -16,7 +16,6 @@
 #include <vector>
 
 #include "foundation/url.h"
-#include "retrieval/cancellation.h"
 #include "retrieval/connection.h"
 #include "retrieval/retry_policy.h"
 #include "retrieval/ticket_fetch.h"
@@ -71,11 +70,12 @@ class TicketRequests {
     std::optional<Cause> end() const;
 
   private:
-    enum class Try : std::uint8_t { isDone, mayBeRepeated };
-    Try attempt(const TicketWish& wish, const https::Request& request, RequestedTicket& result,
-                std::optional<std::chrono::seconds>& retryAfter);
-    Try takeResponse(const TicketWish& wish, const Exchange& exchange, RequestedTicket& result,
-                     std::optional<std::chrono::seconds>& retryAfter);
+    struct Try {
+        bool mayBeRepeated = false;
+        std::optional<std::chrono::seconds> retryAfter{};  // the delay that the service asks for
+    };
+    Try attempt(const TicketWish& wish, const https::Request& request, RequestedTicket& result);
+    Try takeResponse(const TicketWish& wish, const Exchange& exchange, RequestedTicket& result) const;
     void takeIssued(const TicketWish& wish, const Exchange& exchange, RequestedTicket& result) const;
     bool hasEnded(FetchedTicket& result) const;
 

@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "foundation/format.h"
+#include "retrieval/artefact_run.h"
 #include "src/messages.h"
 #include "src/ticket_record.h"
 

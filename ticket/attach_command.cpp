@@ -1,4 +1,4 @@
-#include "retrieval/refused_ticket.h"
+#include "retrieval/artefact_run.h"
 #include "retrieval/ticket_fetch.h"
 #include "src/DownloadDelegate.h"
 #include "ticket/artefact.h"

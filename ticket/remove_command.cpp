@@ -1,4 +1,5 @@
 #include "foundation/format.h"
+#include "retrieval/artefact_run.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/messages.h"
 #include "src/run.h"

@@ -2,7 +2,7 @@
 #include <unistd.h>
 
 #include "companion/command_line.h"
-#include "retrieval/cause.h"
+#include "retrieval/report.h"
 #include "ticket/commands.h"
 
 namespace pinwell::ticket_files {

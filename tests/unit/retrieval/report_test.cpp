@@ -1,10 +1,13 @@
-// The report on an artefact.
+// Causes and exit statuses, and the report on an artefact.
 #include "retrieval/report.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <set>
+
 #include "foundation/json.h"
+#include "foundation/value.h"
 
 namespace pinwell::test {
 namespace {
@@ -13,6 +16,30 @@ using retrieval::Cause;
 using retrieval::Report;
 using testing::HasSubstr;
 using testing::Not;
+
+TEST(Cause, HasANameOfItsOwn) {
+    std::set<std::string_view> names;
+    for (const Cause cause : retrieval::allCauses()) {
+        EXPECT_FALSE(nameOf(cause).empty());
+        names.insert(nameOf(cause));
+    }
+    EXPECT_EQ(names.size(), 14U);
+}
+
+TEST(Cause, OnlyOneCanBeCured) {
+    for (const Cause cause : retrieval::allCauses())
+        EXPECT_EQ(isCurable(cause), cause == Cause::unreachable) << nameOf(cause);
+}
+
+TEST(ExitStatus, TheWorstOfTwoCounts) {
+    const std::vector<int> fromWorst{77, 73, 65, 66, 68, 1, 0};
+    for (std::size_t i = 0; i < fromWorst.size(); ++i) {
+        for (std::size_t j = i; j < fromWorst.size(); ++j) {
+            EXPECT_EQ(retrieval::worseStatus(fromWorst[i], fromWorst[j]), fromWorst[i]);
+            EXPECT_EQ(retrieval::worseStatus(fromWorst[j], fromWorst[i]), fromWorst[i]);
+        }
+    }
+}
 
 Report reportOf(Cause cause, int status) {
     return {.path = "a.dmg",

@@ -1,16 +1,11 @@
-// The hash in the name of a record, and the causes.
-#include <gmock/gmock.h>
-#include <gtest/gtest.h>
-
-#include <set>
-
-#include "retrieval/cause.h"
+// The hash in the name of a record.
 #include "retrieval/ticket_fetch.h"
+
+#include <gtest/gtest.h>
 
 namespace pinwell::test {
 namespace {
 
-using retrieval::Cause;
 using retrieval::hashInRecordName;
 
 const std::string kTwenty(40, 'a');
@@ -48,30 +43,6 @@ TEST(RecordName, ReturnsNulloptForOtherText) {
                                     std::string("release/Sample.dmg"),
                                     "./2/2/" + kTwenty})
         EXPECT_EQ(hashInRecordName(name), std::nullopt) << name;
-}
-
-TEST(Cause, HasANameOfItsOwn) {
-    std::set<std::string_view> names;
-    for (const Cause cause : retrieval::allCauses()) {
-        EXPECT_FALSE(nameOf(cause).empty());
-        names.insert(nameOf(cause));
-    }
-    EXPECT_EQ(names.size(), 14U);
-}
-
-TEST(Cause, OnlyOneCanBeCured) {
-    for (const Cause cause : retrieval::allCauses())
-        EXPECT_EQ(isCurable(cause), cause == Cause::unreachable) << nameOf(cause);
-}
-
-TEST(ExitStatus, TheWorstOfTwoCounts) {
-    const std::vector<int> fromWorst{77, 73, 65, 66, 68, 1, 0};
-    for (std::size_t i = 0; i < fromWorst.size(); ++i) {
-        for (std::size_t j = i; j < fromWorst.size(); ++j) {
-            EXPECT_EQ(retrieval::worseStatus(fromWorst[i], fromWorst[j]), fromWorst[i]);
-            EXPECT_EQ(retrieval::worseStatus(fromWorst[j], fromWorst[i]), fromWorst[i]);
-        }
-    }
 }
 
 }  // namespace
