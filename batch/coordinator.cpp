@@ -6,7 +6,7 @@
 #include <array>
 #include <utility>
 
-#include "companion/ending_signals.h"
+#include "companion/process.h"
 #include "src/DownloadDelegate.h"
 #include "src/messages.h"
 
@@ -22,6 +22,10 @@ namespace {
 constexpr std::chrono::milliseconds kGathering{20};
 constexpr std::chrono::seconds kPatienceWithAGroup{1};
 
+// The maximum number of groups at once. One is enough if the service responds; the others are for slow
+// responses.
+constexpr std::size_t kMostGroups = 4;
+
 Clock::duration clockTime(Seconds seconds) {
     return std::chrono::duration_cast<Clock::duration>(seconds);
 }
@@ -33,6 +37,61 @@ std::optional<Clock::time_point> earlier(std::optional<Clock::time_point> a,
 }
 
 }  // namespace
+
+// Belongs to the coordinator's thread. While a worker has it (`isAtWork`), `run` and `answer` belong to the
+// worker.
+struct Coordinator::Item {
+    std::string path;
+    std::unique_ptr<retrieval::ArtefactRun> run;
+    retrieval::Answer answer;
+
+    Clock::time_point begun;
+    std::optional<Clock::time_point> deadline;
+    bool isAtWork = false;
+    bool wasDoneBefore = false;  // by an earlier run
+    bool isWaiting = false;
+    bool hasEnded = false;
+
+    unsigned attempts = 0;  // lookups
+    unsigned failures = 0;  // lookups without a result
+    unsigned polls = 0;     // lookups whose result was: no ticket yet
+    std::optional<Clock::time_point> notIssuedSince;
+    std::optional<foundation::Error> lastError;
+};
+
+// Lookups in progress: groups of items at the record service, each on its own thread.
+class Coordinator::Lookups {
+  public:
+    using Take = std::function<void(std::vector<ItemRef> group, std::vector<retrieval::Answer> answers)>;
+
+    // `take` gets each group with its answers, on a thread of this object.
+    Lookups(const Platform& platform, Take take) : service_(platform), take_(std::move(take)) {}
+
+    // Cancels the running lookups, and waits for them.
+    ~Lookups() { cancellation_.cancel(); }
+    Lookups(const Lookups&) = delete;
+    Lookups& operator=(const Lookups&) = delete;
+
+    // Asks for the records of at most kNamesPerRequest items. Returns at once.
+    void ask(std::vector<ItemRef> group, std::optional<Clock::time_point> deadline) {
+        // The names are read here: the rest of an item may belong to another thread later.
+        std::vector<std::string> names;
+        for (const ItemRef& item : group) names.push_back(item->run->recordName());
+        threads_.add([this, deadline, names = std::move(names), group = std::move(group)]() mutable {
+            std::vector<retrieval::Answer> answers = service_.lookUp(names, cancellation_, deadline);
+            take_(std::move(group), std::move(answers));
+        });
+    }
+
+    // The running lookups end soon, and all later ones too.
+    void cancel() { cancellation_.cancel(); }
+
+  private:
+    retrieval::Cancellation cancellation_;
+    retrieval::RecordService service_;
+    const Take take_;
+    Workers threads_{kMostGroups};  // last: they use all of the above
+};
 
 Coordinator::Coordinator(const Settings& settings, const Platform& platform, companion::PathList& paths,
                          const foundation::FileDescriptor& signals, Events events)
@@ -252,7 +311,7 @@ void Coordinator::startLookups() {
         for (const ItemRef& item : group)
             if (deadline) deadline = std::max(*deadline, *item->deadline);
         if (!lookups_)
-            lookups_.emplace(platform_, [this](auto items, auto answers) {
+            lookups_ = std::make_unique<Lookups>(platform_, [this](auto items, auto answers) {
                 put(Answered{std::move(items), std::move(answers)});
             });
         ++groups_;
@@ -277,9 +336,9 @@ void Coordinator::startWork() {
 
 // Returns false if there is no path now or later.
 bool Coordinator::beginNext() {
-    std::string path;
     if (list_ == companion::PathList::State::end || list_ == companion::PathList::State::broken) return false;
-    list_ = paths_.next(path);
+    auto [state, path] = paths_.next();
+    list_ = state;
     if (list_ != companion::PathList::State::path) return false;
     hasSeenPaths_ = true;
     if (!events_.isWanted(path)) return true;

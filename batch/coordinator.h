@@ -10,19 +10,23 @@
 #include <deque>
 #include <functional>
 #include <map>
+#include <memory>
 #include <mutex>
 #include <optional>
+#include <string>
 #include <variant>
 #include <vector>
 
-#include "batch/item.h"
-#include "batch/lookups.h"
+#include "batch/report.h"
 #include "batch/settings.h"
-#include "batch/wake_up.h"
 #include "batch/workers.h"
-#include "companion/path_list.h"
+#include "companion/streams.h"
+#include "retrieval/artefact_run.h"
+#include "retrieval/record_service.h"
 
 namespace pinwell::batch {
+
+using retrieval::Clock;
 
 /// The maximum number of artefacts held with all their data, and the maximum number of all, with the waiting
 /// ones.
@@ -62,6 +66,9 @@ class Coordinator {
     const std::optional<foundation::Error>& listError() const noexcept { return paths_.error(); }
 
   private:
+    struct Item;    // an artefact in progress
+    class Lookups;  // groups of them at the record service
+    using ItemRef = std::shared_ptr<Item>;
     struct Worked {
         ItemRef item;
         std::optional<retrieval::Outcome> outcome;  // `nullopt`: a record must be looked up
@@ -124,7 +131,7 @@ class Coordinator {
     std::vector<Result> results_;
 
     Workers workers_;
-    std::optional<Lookups> lookups_;  // made when first needed
+    std::unique_ptr<Lookups> lookups_;  // made when first needed
 };
 
 }  // namespace pinwell::batch

@@ -1,23 +1,25 @@
 // pinwell-batch: many artefacts in one process.
 #include <malloc.h>
+#include <sys/ioctl.h>
 #include <sysexits.h>
 #include <unistd.h>
 
-#include <array>
+#include <algorithm>
+#include <chrono>
 #include <csignal>
-#include <cstdlib>
 #include <exception>
 #include <optional>
+#include <string>
+#include <utility>
 
-#include "batch/command_line.h"
 #include "batch/coordinator.h"
 #include "batch/journal.h"
-#include "batch/junit.h"
-#include "batch/progress.h"
+#include "batch/report.h"
 #include "batch/selection.h"
-#include "companion/command_line.h"
-#include "companion/ending_signals.h"
-#include "companion/own_temporary_directory.h"
+#include "batch/settings.h"
+#include "companion/process.h"
+#include "companion/streams.h"
+#include "foundation/format.h"
 #include "foundation/process.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
@@ -35,6 +37,52 @@ constexpr int kMostArenas = 2;
 void complain(const std::string& text) {
     companion::complain(kProgramName, text);
 }
+
+/// Rewrites one line of standard error, ten times a second at most.
+class Progress {
+  public:
+    /// Shows nothing unless `isShown`.
+    explicit Progress(bool isShown) : isShown_(isShown) {}
+    ~Progress() { clear(); }
+    Progress(const Progress&) = delete;
+    Progress& operator=(const Progress&) = delete;
+
+    void show(std::uint64_t done, std::uint64_t failed, std::size_t inWork) {
+        if (!isShown_) return;
+        const auto now = Clock::now();
+        if (now - last_ < kInterval) return;
+        last_ = now;
+        isOnScreen_ = true;
+        std::string line =
+            foundation::format("%llu done, %llu of them failed, %zu in work", done, failed, inWork);
+        line.resize(std::min(line.size(), columns() - 1));  // a second line could not be cleared
+        errors_.write(kEraseLine + line);
+    }
+
+    /// Removes the line, so that another line can be printed.
+    void clear() {
+        if (!isOnScreen_) return;
+        isOnScreen_ = false;
+        errors_.write(kEraseLine);
+    }
+
+  private:
+    // The width of the terminal, which may change at any time.
+    static std::size_t columns() {
+        winsize size{};
+        if (::ioctl(STDERR_FILENO, TIOCGWINSZ, &size) != 0 || size.ws_col == 0) return kUsualColumns;
+        return size.ws_col;
+    }
+
+    static constexpr std::chrono::milliseconds kInterval{100};
+    static constexpr const char* kEraseLine = "\r\x1b[K";
+    static constexpr std::size_t kUsualColumns = 80;
+
+    const bool isShown_;
+    companion::Output errors_{STDERR_FILENO};
+    bool isOnScreen_ = false;
+    Clock::time_point last_;
+};
 
 class Run {
   public:
@@ -222,10 +270,10 @@ int main(int argc, char** argv) {
     std::signal(SIGPIPE, SIG_IGN);
     std::signal(SIGXFSZ, SIG_IGN);
     try {
-        Settings settings;
-        if (const auto status = readCommandLine(argc, argv, settings)) return *status;
+        const CommandLine line = readCommandLine(argc, argv);
+        if (line.exitStatus) return *line.exitStatus;
         const foundation::FileDescriptor signals = companion::takeEndingSignals();
-        return runBatch(settings, signals);
+        return runBatch(line.settings, signals);
     } catch (const std::exception& error) {
         complain(error.what());
         return EX_SOFTWARE;

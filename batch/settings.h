@@ -1,18 +1,19 @@
-// The settings of a batch.
+// The settings of a batch, and the command line that they come from.
 #pragma once
 
-#include <chrono>
 #include <cstdint>
 #include <optional>
 #include <string>
 #include <vector>
 
-#include "companion/output.h"
+#include "companion/command_line.h"
 #include "retrieval/retry_policy.h"
 
 namespace pinwell::batch {
 
-using Seconds = std::chrono::duration<double>;
+inline constexpr const char* kProgramName = "pinwell-batch";
+
+using companion::Seconds;
 
 struct Settings {
     std::uint8_t operation = 0;  // kOperationStaple or kOperationValidate
@@ -40,5 +41,14 @@ struct Settings {
     companion::ColorWhen color = companion::ColorWhen::automatic;
     std::optional<std::string> junit;
 };
+
+struct CommandLine {
+    /// The process must end with this status: the help or an error was printed.
+    std::optional<int> exitStatus;
+
+    Settings settings{};
+};
+
+CommandLine readCommandLine(int argc, char** argv);
 
 }  // namespace pinwell::batch

@@ -1,5 +1,10 @@
 #include "batch/workers.h"
 
+#include <sys/eventfd.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdint>
 #include <system_error>
 #include <utility>
 
@@ -44,6 +49,21 @@ void Workers::work() {
         task = nullptr;  // frees its objects before the thread waits
         lock.lock();
     }
+}
+
+WakeUp::WakeUp() : event_(::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
+    if (!event_) throw std::system_error(errno, std::generic_category(), "eventfd");
+}
+
+void WakeUp::raise() noexcept {
+    const std::uint64_t one = 1;
+    // Fails only if the counter is full; then the descriptor is already readable.
+    [[maybe_unused]] const ssize_t ignored = ::write(event_.get(), &one, sizeof one);
+}
+
+void WakeUp::clear() noexcept {
+    std::uint64_t count = 0;
+    [[maybe_unused]] const ssize_t ignored = ::read(event_.get(), &count, sizeof count);
 }
 
 }  // namespace pinwell::batch

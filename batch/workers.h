@@ -1,12 +1,16 @@
-// Threads that take tasks from one queue.
+// Threads that take tasks from one queue, and the signal to the thread that waits for their results in
+// poll(2).
 #pragma once
 
 #include <condition_variable>
+#include <cstddef>
 #include <deque>
 #include <functional>
 #include <mutex>
 #include <thread>
 #include <vector>
+
+#include "foundation/file_io.h"
 
 namespace pinwell::batch {
 
@@ -34,6 +38,25 @@ class Workers {
     std::size_t idle_ = 0;
     bool stopping_ = false;
     std::vector<std::thread> threads_;
+};
+
+/// Wakes a thread that waits in poll(2).
+class WakeUp {
+  public:
+    /// Throws std::system_error.
+    WakeUp();
+
+    /// From any thread.
+    void raise() noexcept;
+
+    /// Resets it.
+    void clear() noexcept;
+
+    /// Readable from raise() to clear().
+    int descriptor() const noexcept { return event_.get(); }
+
+  private:
+    foundation::FileDescriptor event_;
 };
 
 }  // namespace pinwell::batch

@@ -1,6 +1,8 @@
 #include "companion/command_line.h"
 
+#include <curl/curl.h>
 #include <getopt.h>
+#include <openssl/crypto.h>
 #include <sysexits.h>
 #include <unistd.h>
 
@@ -9,8 +11,8 @@
 #include <cstdlib>
 #include <numeric>
 
-#include "companion/version.h"
 #include "foundation/description.h"
+#include "foundation/format.h"
 
 namespace pinwell::companion {
 namespace {
@@ -66,7 +68,8 @@ std::string helpOf(const Program& program) {
                 command.name + " [OPTION]... [--] " + command.arguments + "\n";
     text += "\nSubcommands:\n";
     for (const Command& command : program.commands) text += helpLine(command.name, command.help);
-    text += "\nOptions:\n" + helpLine("-h,--help", "Print this help, and after a command that of the command") +
+    text += "\nOptions:\n" +
+            helpLine("-h,--help", "Print this help, and after a command that of the command") +
             helpLine("    --version", "Print the version");
     return text + (program.epilogue.empty() ? "" : "\n" + program.epilogue + "\n");
 }
@@ -134,9 +137,10 @@ class Reader {
                                    : *std::find_if(command_.options.begin(), command_.options.end(),
                                                    [&](const Option& one) { return one.letter == found; });
         const std::string value = optarg == nullptr ? std::string() : std::string(optarg);
-        if (const auto wrong = option.take(value))
-            return refuse("--" + option.name + (option.argument.empty() ? "" : " " + value) + ": " + *wrong);
-        return std::nullopt;
+        const auto taken = option.take(value);
+        if (taken) return std::nullopt;
+        return refuse("--" + option.name + (option.argument.empty() ? "" : " " + value) + ": " +
+                      taken.error().localizedFailureReason());
     }
 
     static std::string nameOfWord(std::string_view word) {
@@ -227,36 +231,75 @@ Parsed parseCommand(const Program& program, int argc, char** argv) {
     return {.exitStatus = EX_USAGE, .command = nullptr, .arguments = {}};
 }
 
-std::optional<std::string> takeCount(const std::string& text, std::uint64_t lowest, std::uint64_t highest,
-                                     std::uint64_t& value) {
+foundation::Error wrongValue(std::string fault) {
+    return {foundation::kDataErrorDomain, foundation::kMalformedDocument, std::move(fault)};
+}
+
+foundation::Result<std::uint64_t> readCount(std::string_view text, std::uint64_t lowest,
+                                            std::uint64_t highest) {
     std::uint64_t number = 0;
     const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
     const bool isNumber = error == std::errc{} && end == text.data() + text.size() && !text.empty();
     if (!isNumber || number < lowest || number > highest)
-        return "is not a number from " + std::to_string(lowest) + " to " + std::to_string(highest);
-    value = number;
-    return std::nullopt;
+        return wrongValue("is not a number from " + std::to_string(lowest) + " to " +
+                          std::to_string(highest));
+    return number;
 }
 
-std::optional<std::string> takeSeconds(const std::string& text, std::chrono::duration<double>& value) {
+foundation::Result<Seconds> readSeconds(std::string_view text) {
     double number = 0;
     const auto [end, error] =
         std::from_chars(text.data(), text.data() + text.size(), number, std::chars_format::fixed);
     const bool isNumber = error == std::errc{} && end == text.data() + text.size() && !text.empty();
-    if (!isNumber || !(number >= 0) || number > kMostSeconds) return "is not a number of seconds";
-    value = std::chrono::duration<double>(number);
-    return std::nullopt;
+    if (!isNumber || !(number >= 0) || number > kMostSeconds) return wrongValue("is not a number of seconds");
+    return Seconds(number);
 }
 
-std::optional<std::string> takeWord(const std::string& text, std::span<const std::string_view> words,
-                                    std::string& value) {
-    if (std::find(words.begin(), words.end(), text) == words.end()) {
-        std::string all;
-        for (const std::string_view word : words) all += (all.empty() ? "" : ", ") + std::string(word);
-        return "is none of: " + all;
-    }
-    value = text;
-    return std::nullopt;
+Option flagOption(std::string name, char letter, std::string help, bool& value) {
+    return {std::move(name), letter, "", std::move(help), [&value](const std::string&) {
+                value = true;
+                return foundation::Result<void>();
+            }};
+}
+
+Option textOption(std::string name, char letter, std::string argument, std::string help,
+                  std::optional<std::string>& value) {
+    return {std::move(name), letter, std::move(argument), std::move(help),
+            [&value](const std::string& given) -> foundation::Result<void> {
+                if (given.empty()) return wrongValue("is empty");
+                if (value) return wrongValue("is given twice");
+                value = given;
+                return {};
+            }};
+}
+
+std::vector<Option> outputOptions(ColorWhen& color, bool& isQuiet, bool& isVerbose) {
+    const auto setOneOf = [](bool& set, bool& other) {
+        return [&set, &other](const std::string&) {
+            set = true;
+            other = false;
+            return foundation::Result<void>();
+        };
+    };
+    return {{"color", 0, "WHEN", "Colour the lines: auto, always or never (default: auto)",
+             [&color](const std::string& word) -> foundation::Result<void> {
+                 if (word != "auto" && word != "always" && word != "never")
+                     return wrongValue("is none of: auto, always, never");
+                 color = colorWhenNamed(word);
+                 return {};
+             }},
+            {"quiet", 'q', "", "Print nothing but JSON", setOneOf(isQuiet, isVerbose)},
+            {"verbose", 'v', "", "Print all that pinwell -v says", setOneOf(isVerbose, isQuiet)}};
+}
+
+std::string versionText(std::string_view program) {
+    return foundation::format("%s %s (commit %s, OpenSSL %s, curl %s)", program, PINWELL_VERSION,
+                              PINWELL_COMMIT, OpenSSL_version(OPENSSL_VERSION_STRING),
+                              curl_version_info(CURLVERSION_NOW)->version);
+}
+
+std::string versionNumber() {
+    return PINWELL_VERSION;
 }
 
 }  // namespace pinwell::companion

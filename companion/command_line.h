@@ -1,13 +1,16 @@
-// The command lines of the companions. One table for each command defines its options and its
-// help.
+// The command lines of the companions: options, help, versions, errors. An error is one line on standard
+// error, with the nearest existing name, and exit status 64.
 //
-//   Command staple{"staple", "PATH...", "Staples each artefact.", {
-//       {"jobs", 'j', "N", "How many at once", [&](const std::string& text) { return take(text, jobs); }}}};
-//   const Parsed parsed = parseCommand("pinwell-batch", {staple}, argc, argv);
+// pinwell-batch and pinwell-ticket have a table for each command, with its options and its help:
+//
+//   const Program program{.name = "pinwell-batch", .help = "...", .epilogue = "...", .commands = {
+//       {"staple", "PATH...", "Staples each artefact.", {
+//           countOption("jobs", 'j', "N", "How many at once", 1, kMostJobs, settings.jobs)}}}};
+//   const Parsed parsed = parseCommand(program, argc, argv);
 //   if (parsed.exitStatus) return *parsed.exitStatus;
 //
-// A line is `PROGRAM COMMAND [OPTION]... [--] ARGUMENT...`; options may be among the arguments. An error is
-// one line on standard error, with the nearest existing name, and exit status 64.
+// Their line is `PROGRAM COMMAND [OPTION]... [--] ARGUMENT...`; options may be among the arguments. The other
+// companions read their options with CLI11, and share the wording of errors and versions.
 #pragma once
 
 #include <chrono>
@@ -17,13 +20,24 @@
 #include <span>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
+
+#include "companion/streams.h"
+#include "foundation/error.h"
+
+namespace CLI {
+class App;
+class ParseError;
+}  // namespace CLI
 
 namespace pinwell::companion {
 
-/// Takes an option's value, empty for an option without a value. Returns the fault of a wrong value, such as
-/// "is not a number".
-using TakeOption = std::function<std::optional<std::string>(const std::string& value)>;
+using Seconds = std::chrono::duration<double>;
+
+/// Takes an option's value, empty for an option without a value. The reason of an error is the fault of a
+/// wrong value, such as "is not a number".
+using TakeOption = std::function<foundation::Result<void>(const std::string& value)>;
 
 struct Option {
     std::string name;      // without dashes
@@ -58,23 +72,72 @@ struct Parsed {
 /// Reads the line. `arguments` of the result holds everything except the options, byte for byte.
 Parsed parseCommand(const Program& program, int argc, char** argv);
 
+// Values. The reason of an error is the fault of the text, as TakeOption has it.
+
+/// A whole number between the two bounds.
+foundation::Result<std::uint64_t> readCount(std::string_view text, std::uint64_t lowest,
+                                            std::uint64_t highest);
+
+/// Seconds, with or without decimals, up to ten years.
+foundation::Result<Seconds> readSeconds(std::string_view text);
+
+/// The fault of a value.
+foundation::Error wrongValue(std::string fault);
+
+// Options. Each sets a value that must outlive it. `name`, `letter`, `argument` and `help` as in Option.
+
+Option flagOption(std::string name, char letter, std::string help, bool& value);
+
+/// A text, not empty, given once.
+Option textOption(std::string name, char letter, std::string argument, std::string help,
+                  std::optional<std::string>& value);
+
+/// A whole number between the two bounds.
+template <class Number>
+Option countOption(std::string name, char letter, std::string argument, std::string help,
+                   std::uint64_t lowest, std::uint64_t highest, Number& value) {
+    return {std::move(name), letter, std::move(argument), std::move(help),
+            [lowest, highest, &value](const std::string& text) -> foundation::Result<void> {
+                const auto count = readCount(text, lowest, highest);
+                if (!count) return count.error();
+                value = static_cast<Number>(*count);
+                return {};
+            }};
+}
+
+/// A number of seconds; `Time` is Seconds or an optional of it.
+template <class Time>
+Option secondsOption(std::string name, std::string help, Time& value) {
+    return {std::move(name), 0, "SECONDS", std::move(help),
+            [&value](const std::string& text) -> foundation::Result<void> {
+                const auto seconds = readSeconds(text);
+                if (!seconds) return seconds.error();
+                value = *seconds;
+                return {};
+            }};
+}
+
+/// "--color WHEN", "--quiet" and "--verbose". The last of the latter two counts.
+std::vector<Option> outputOptions(ColorWhen& color, bool& isQuiet, bool& isVerbose);
+
+// For all companions.
+
 /// "PROGRAM: TEXT" on standard error, in one line, control characters escaped.
 void complain(std::string_view program, std::string_view text);
 
 /// The word most similar to `word`; empty if none is similar.
 std::string_view nearestWord(std::string_view word, std::span<const std::string_view> words);
 
-// Values. Each sets the value, or returns the fault of the text.
+/// Describes the fault of a command line that CLI11 refused: the library's error, or for an unknown command
+/// or option its name and the nearest existing one. One line, without its end; control characters are
+/// escaped.
+std::string describe(const CLI::App& app, const CLI::ParseError& error);
 
-/// A whole number between the two bounds.
-std::optional<std::string> takeCount(const std::string& text, std::uint64_t lowest, std::uint64_t highest,
-                                     std::uint64_t& value);
+/// "PROGRAM 34.0 (commit 0123456789ab, OpenSSL 3.0.17, curl 7.88.1)": the libraries are the loaded ones.
+/// Without a line end.
+std::string versionText(std::string_view program);
 
-/// Seconds, with or without decimals, up to ten years.
-std::optional<std::string> takeSeconds(const std::string& text, std::chrono::duration<double>& value);
-
-/// One of these words.
-std::optional<std::string> takeWord(const std::string& text, std::span<const std::string_view> words,
-                                    std::string& value);
+/// "34.0"
+std::string versionNumber();
 
 }  // namespace pinwell::companion

@@ -1,5 +1,4 @@
-#include "companion/parse_errors.h"
-
+// The errors of command lines that CLI11 reads.
 #include <CLI/CLI.hpp>
 #include <string_view>
 #include <vector>

@@ -14,8 +14,6 @@
 
 #include "codesign/code_error.h"
 #include "companion/command_line.h"
-#include "companion/parse_errors.h"
-#include "companion/version.h"
 #include "foundation/format.h"
 #include "foundation/process.h"
 #include "gate/find.h"

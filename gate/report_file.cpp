@@ -9,7 +9,7 @@
 #include <filesystem>
 #include <system_error>
 
-#include "companion/output.h"
+#include "companion/streams.h"
 
 namespace pinwell::gate {
 

@@ -12,9 +12,7 @@
 #include <vector>
 
 #include "companion/command_line.h"
-#include "companion/output.h"
-#include "companion/parse_errors.h"
-#include "companion/version.h"
+#include "companion/streams.h"
 #include "foundation/process.h"
 #include "foundation/stack_guard.h"
 #include "inspect/gather.h"

@@ -9,8 +9,7 @@
 #include <string>
 #include <vector>
 
-#include "companion/parse_errors.h"
-#include "companion/version.h"
+#include "companion/command_line.h"
 #include "crypto/crypto.h"
 #include "foundation/date.h"
 #include "foundation/format.h"

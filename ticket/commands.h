@@ -5,7 +5,7 @@
 #include <memory>
 #include <string>
 
-#include "companion/output.h"
+#include "companion/streams.h"
 #include "https/client_identity.h"
 #include "retrieval/report.h"
 #include "src/platform.h"

@@ -5,8 +5,8 @@
 #include <set>
 #include <utility>
 
-#include "companion/ending_signals.h"
-#include "companion/path_list.h"
+#include "companion/process.h"
+#include "companion/streams.h"
 #include "retrieval/ticket_fetch.h"
 #include "ticket/artefact.h"
 #include "ticket/commands.h"
@@ -72,10 +72,10 @@ class Fetching {
             return false;
         }
         bool isEmpty = true;
-        std::string argument;
-        companion::PathList::State state{};
-        while ((state = list->nextOrWait(argument)) == companion::PathList::State::path) {
+        companion::PathList::Entry entry;
+        while ((entry = list->nextOrWait()).state == companion::PathList::State::path) {
             isEmpty = false;
+            const std::string& argument = entry.path;
             if (retrieval::hashInRecordName(argument)) {
                 want({}, argument);
                 continue;
@@ -93,7 +93,7 @@ class Fetching {
             const std::string name = artefact.report.recordName;
             want(std::move(artefact.report), name);
         }
-        if (state == companion::PathList::State::broken) {
+        if (entry.state == companion::PathList::State::broken) {
             reporter_.complain(
                 "the list cannot be read any further: " + list->error()->localizedDescription(),
                 kExitNoInput);

@@ -2,12 +2,13 @@
 #include <malloc.h>
 #include <sysexits.h>
 
-#include <array>
 #include <csignal>
 #include <exception>
 #include <memory>
-#include <string_view>
+#include <optional>
+#include <string>
 #include <utility>
+#include <vector>
 
 #include "companion/command_line.h"
 #include "crypto/crypto.h"
@@ -26,91 +27,54 @@ namespace {
 
 using namespace pinwell;
 using namespace pinwell::ticket_files;
+using companion::flagOption;
 using companion::Option;
-using Wrong = std::optional<std::string>;
+using companion::textOption;
 
 constexpr std::uint64_t kMostRetries = 1000;
 
-Option flag(const char* name, char letter, const char* help, bool& value) {
-    return {name, letter, "", help, [&value](const std::string&) {
-                value = true;
-                return Wrong();
-            }};
-}
-
-Option text(const char* name, char letter, const char* argument, const char* help,
-            std::optional<std::string>& value) {
-    return {name, letter, argument, help, [&value](const std::string& given) -> Wrong {
-                if (given.empty()) return "is empty";
-                if (value) return "is given twice";
-                value = given;
-                return std::nullopt;
-            }};
-}
-
 std::vector<Option> withCommon(std::vector<Option> options, Settings& settings) {
-    options.push_back(flag("json", 0, "Print one JSON object each, on a line", settings.asJson));
-    options.push_back({"color", 0, "WHEN", "Colour the lines: auto, always or never (default: auto)",
-                       [&](const std::string& given) {
-                           static constexpr std::array<std::string_view, 3> kWords{"auto", "always", "never"};
-                           std::string word;
-                           Wrong wrong = companion::takeWord(given, kWords, word);
-                           settings.color = companion::colorWhenNamed(word);
-                           return wrong;
-                       }});
-    options.push_back({"quiet", 'q', "", "Print nothing but JSON", [&](const std::string&) {
-                           settings.isQuiet = true;
-                           settings.isVerbose = false;
-                           return Wrong();
-                       }});
-    options.push_back({"verbose", 'v', "", "Print all that pinwell -v says", [&](const std::string&) {
-                           settings.isVerbose = true;
-                           settings.isQuiet = false;
-                           return Wrong();
-                       }});
+    options.push_back(flagOption("json", 0, "Print one JSON object each, on a line", settings.asJson));
+    for (Option& option : companion::outputOptions(settings.color, settings.isQuiet, settings.isVerbose))
+        options.push_back(std::move(option));
     return options;
 }
 
-// Of the commands that ask a service for many tickets and keep them.
+// For the commands that ask a service for many tickets and keep them.
 std::vector<Option> manyOptions(Settings& settings) {
     return {
-        text("from", 0, "FILE", "Read names from a file, one a line; - is standard input", settings.from),
-        flag("null", '0', "A zero byte ends each name of that file, not a newline",
-             settings.isZeroTerminated),
-        text("out", 'o', "DIR", "The directory to put them in (needed)", settings.output),
-        {"retries", 0, "N", "How often to try again what is out of reach (default: 5)",
-         [&](const std::string& given) {
-             std::uint64_t number = 0;
-             Wrong wrong = companion::takeCount(given, 0, kMostRetries, number);
-             settings.retry.retries = static_cast<unsigned>(number);
-             return wrong;
-         }},
-        {"retry-delay", 0, "SECONDS", "Before the first of these tries; doubled each time (default: 1)",
-         [&](const std::string& given) { return companion::takeSeconds(given, settings.retry.firstDelay); }},
-        {"deadline", 0, "SECONDS", "The time that all of them may take",
-         [&](const std::string& given) {
-             return companion::takeSeconds(given, settings.deadline.emplace());
-         }},
+        textOption("from", 0, "FILE", "Read names from a file, one a line; - is standard input",
+                   settings.from),
+        flagOption("null", '0', "A zero byte ends each name of that file, not a newline",
+                   settings.isZeroTerminated),
+        textOption("out", 'o', "DIR", "The directory to put them in (needed)", settings.output),
+        companion::countOption("retries", 0, "N", "How often to try again what is out of reach (default: 5)",
+                               0, kMostRetries, settings.retry.retries),
+        companion::secondsOption("retry-delay",
+                                 "Before the first of these tries; doubled each time (default: 1)",
+                                 settings.retry.firstDelay),
+        companion::secondsOption("deadline", "The time that all of them may take", settings.deadline),
     };
 }
 
 std::vector<Option> fetchOptions(Settings& settings) {
     std::vector<Option> options = manyOptions(settings);
-    options.push_back(
-        {"wait", 0, "SECONDS", "Ask again for so long for tickets that are not issued yet",
-         [&](const std::string& given) { return companion::takeSeconds(given, settings.wait); }});
+    options.push_back(companion::secondsOption(
+        "wait", "Ask again for so long for tickets that are not issued yet", settings.wait));
     return options;
 }
 
 std::vector<Option> requestOptions(Settings& settings) {
     std::vector<Option> options{
-        text("url", 0, "URL", "The service's administration listener: https://HOST:PORT (needed)",
-             settings.url),
-        text("cert", 0, "FILE", "This client's certificate, in PEM (needed)", settings.certificate),
-        text("key", 0, "FILE", "Its private key, in PEM, unencrypted (needed)", settings.key),
-        text("label", 0, "TEXT", "What the artefact is, for people (default: its file name)", settings.label),
-        flag("reinstate", 0, "Issue even where the record is revoked; needs --comment", settings.reinstates),
-        text("comment", 0, "TEXT", "For the service's log", settings.comment),
+        textOption("url", 0, "URL", "The service's administration listener: https://HOST:PORT (needed)",
+                   settings.url),
+        textOption("cert", 0, "FILE", "This client's certificate, in PEM (needed)", settings.certificate),
+        textOption("key", 0, "FILE", "Its private key, in PEM, unencrypted (needed)", settings.key),
+        textOption("label", 0, "TEXT", "What the artefact is, for people (default: its file name)",
+                   settings.label),
+        flagOption("reinstate", 0, "Issue even where the record is revoked; needs --comment",
+                   settings.reinstates),
+        textOption("comment", 0, "TEXT", "For the service's log", settings.comment),
     };
     for (Option& option : manyOptions(settings)) options.push_back(std::move(option));
     return options;
@@ -133,12 +97,13 @@ companion::Program programFor(Settings& settings) {
             {"request", "PATH...", "Has a record service issue tickets for artefacts.",
              withCommon(requestOptions(settings), settings)},
             {"attach", "PATH...", "Attaches tickets from files.",
-             withCommon({text("tickets", 0, "DIR", "A directory that fetch has filled", settings.tickets),
-                         text("ticket", 0, "FILE", "One ticket, for all of the artefacts", settings.ticket)},
-                        settings)},
+             withCommon(
+                 {textOption("tickets", 0, "DIR", "A directory that fetch has filled", settings.tickets),
+                  textOption("ticket", 0, "FILE", "One ticket, for all of the artefacts", settings.ticket)},
+                 settings)},
             {"extract", "PATH", "Writes the ticket of an artefact to a new file.",
-             withCommon({text("output", 'o', "FILE", "The file to make (default: named by the record)",
-                              settings.output)},
+             withCommon({textOption("output", 'o', "FILE", "The file to make (default: named by the record)",
+                                    settings.output)},
                         settings)},
             {"remove", "PATH...", "Removes the ticket of each artefact.", withCommon({}, settings)},
         }};
@@ -162,7 +127,7 @@ std::optional<int> refuseRequest(const Settings& settings) {
     return std::nullopt;
 }
 
-// What the options of a command do not say by themselves.
+// Checks the rules between the options and the arguments of a command.
 std::optional<int> refuseUsage(const std::string& command, const Settings& settings) {
     if (settings.arguments.empty() && !settings.from)
         return refuse(command == "fetch" ? "no name is given; name some, or a list of them with --from"
@@ -177,8 +142,8 @@ std::optional<int> refuseUsage(const std::string& command, const Settings& setti
     return std::nullopt;
 }
 
-// What the command needs, and nothing else. Trash may be anywhere on an artefact's volume, and where the
-// names of a list lead is not known yet.
+// Only the rights that the command needs. The trash may be anywhere on an artefact's volume, and the paths of
+// a list are not known yet.
 sandbox::Confinement rightsFor(const std::string& command, const Settings& settings,
                                const foundation::PlatformDirectory& platform) {
     using sandbox::Access;
@@ -195,7 +160,7 @@ sandbox::Confinement rightsFor(const std::string& command, const Settings& setti
     if (command == "fetch" || command == "request") {
         sandbox::Confinement rights = confinementOfRuns(kOperationValidate, settings.arguments, platform);
         if (settings.from) rights.files.push_back({"/", Access::read});
-        // It is made, unless it is there or is a link to another one.
+        // The directory is made if it is missing; it may be a link.
         rights.files.push_back({directoryOf(*settings.output), Access::write});
         rights.files.push_back({*settings.output, Access::write});
         return rights;
@@ -208,7 +173,7 @@ sandbox::Confinement rightsFor(const std::string& command, const Settings& setti
     return rights;
 }
 
-// Before there is a second thread.
+// Call it before there is a second thread.
 void giveUpRights(const std::string& command, const Settings& settings, const Platform& platform) {
     keepSecurityLibrary();
     platform.systemLog.connect();
@@ -225,10 +190,10 @@ int run(int argc, char** argv) {
     const std::string& command = parsed.command->name;
     if (const auto status = refuseUsage(command, settings)) return *status;
 
-    // Lines are collected an artefact: what is not collected is not printed.
+    // Messages are collected for each artefact: no other line is printed.
     verboseLevel = settings.isVerbose ? kVerbosityVerbose : kVerbosityQuiet;
     const HostPlatform host([](int) {}, HostPlatform::Connections::kept);
-    // Read while its file may be: afterwards the program opens what artefacts and tickets need.
+    // Read before the rights are given up: they do not include this file.
     std::shared_ptr<const https::ClientIdentity> identity;
     if (command == "request") {
         sandbox::forbidCoreDumps();  // they would hold the key
@@ -254,7 +219,7 @@ int main(int argc, char** argv) {
     mallopt(M_ARENA_MAX, 1);
     crypto::wipeWhatOpenSSLFrees();
     foundation::occupyStandardStreams();
-    // A reader that has gone away, and a file that would grow beyond the caller's limit, are failed writes.
+    // A closed pipe, and a file that would exceed the caller's limit, become failed writes.
     std::signal(SIGPIPE, SIG_IGN);
     std::signal(SIGXFSZ, SIG_IGN);
     try {

@@ -5,8 +5,8 @@
 #include <set>
 #include <utility>
 
-#include "companion/ending_signals.h"
-#include "companion/path_list.h"
+#include "companion/process.h"
+#include "companion/streams.h"
 #include "foundation/format.h"
 #include "https/session_options.h"
 #include "retrieval/ticket_request.h"
@@ -81,16 +81,15 @@ class Requesting {
         retrieval::TicketRequests requests(withSessions(platform_, *sessions_), std::move(options),
                                            cancellation);
         bool isEmpty = true;
-        std::string path;
-        companion::PathList::State state{};
-        while ((state = list.nextOrWait(path)) == companion::PathList::State::path) {
+        companion::PathList::Entry entry;
+        while ((entry = list.nextOrWait()).state == companion::PathList::State::path) {
             isEmpty = false;
             if (const auto why = requests.end())
-                leaveOut(path, *why);
+                leaveOut(entry.path, *why);
             else
-                requestFor(path, requests);
+                requestFor(entry.path, requests);
         }
-        if (state == companion::PathList::State::broken)
+        if (entry.state == companion::PathList::State::broken)
             reporter_.complain("the list cannot be read any further: " + list.error()->localizedDescription(),
                                EX_NOINPUT);
         else if (isEmpty)

@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-#include "companion/output.h"
+#include "companion/streams.h"
 #include "retrieval/retry_policy.h"
 
 namespace pinwell::ticket_files {

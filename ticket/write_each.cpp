@@ -1,4 +1,4 @@
-#include "companion/own_temporary_directory.h"
+#include "companion/process.h"
 #include "src/DownloadDelegate.h"
 #include "ticket/commands.h"
 

@@ -9,8 +9,8 @@ namespace pinwell::test {
 namespace {
 
 using companion::nearestWord;
-using companion::takeCount;
-using companion::takeSeconds;
+using companion::readCount;
+using companion::readSeconds;
 
 TEST(NearestWord, IsOneOrTwoEditsAway) {
     static constexpr std::array<std::string_view, 3> kWords{"staple", "validate", "json"};
@@ -29,24 +29,34 @@ TEST(NearestWord, IsEmptyWhereNoneIsNear) {
 }
 
 TEST(Count, IsANumberBetweenTwoBounds) {
-    std::uint64_t value = 0;
-    EXPECT_FALSE(takeCount("1", 1, 10, value));
-    EXPECT_FALSE(takeCount("10", 1, 10, value));
-    EXPECT_EQ(value, 10U);
+    EXPECT_EQ(*readCount("1", 1, 10), 1U);
+    EXPECT_EQ(*readCount("10", 1, 10), 10U);
     for (const char* text :
          {"", "0", "11", "-1", "+1", " 1", "1 ", "1.0", "0x1", "99999999999999999999999", "one"})
-        EXPECT_TRUE(takeCount(text, 1, 10, value)) << text;
-    EXPECT_EQ(value, 10U);
+        EXPECT_FALSE(readCount(text, 1, 10)) << text;
+}
+
+TEST(Option, LeavesItsValueIfTheTextIsWrong) {
+    unsigned count = 7;
+    const auto jobs = companion::countOption("jobs", 'j', "N", "", 1, 10, count);
+    EXPECT_FALSE(jobs.take("11"));
+    EXPECT_EQ(count, 7U);
+    EXPECT_TRUE(jobs.take("10"));
+    EXPECT_EQ(count, 10U);
+
+    std::optional<companion::Seconds> limit;
+    const auto timeout = companion::secondsOption("timeout", "", limit);
+    EXPECT_FALSE(timeout.take("soon"));
+    EXPECT_FALSE(limit);
+    EXPECT_TRUE(timeout.take("1.5"));
+    EXPECT_EQ(limit, companion::Seconds(1.5));
 }
 
 TEST(Seconds, MayHaveDecimals) {
-    std::chrono::duration<double> value{};
-    EXPECT_FALSE(takeSeconds("0", value));
-    EXPECT_FALSE(takeSeconds("1.5", value));
-    EXPECT_EQ(value.count(), 1.5);
+    EXPECT_EQ(readSeconds("0")->count(), 0);
+    EXPECT_EQ(readSeconds("1.5")->count(), 1.5);
     for (const char* text : {"", "-1", "nan", "inf", "1e3", "1s", "999999999999", " 1", "1,5"})
-        EXPECT_TRUE(takeSeconds(text, value)) << text;
-    EXPECT_EQ(value.count(), 1.5);
+        EXPECT_FALSE(readSeconds(text)) << text;
 }
 
 }  // namespace

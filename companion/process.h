@@ -1,10 +1,12 @@
-// The signals that end a run, read one at a time instead of ending the process.
+// The process of a run: the signals that end it, and its temporary directory.
 #pragma once
 
 #include <functional>
 #include <optional>
+#include <string>
 #include <thread>
 
+#include "foundation/error.h"
 #include "foundation/file_io.h"
 
 namespace pinwell::companion {
@@ -33,6 +35,34 @@ class SignalWatch {
     foundation::FileDescriptor signals_;
     foundation::FileDescriptor end_;
     std::thread thread_;
+};
+
+/// A directory of mode 0700 in the user's temporary directory, which becomes the process's temporary
+/// directory
+/// ($TMPDIR): all files of a run can be removed with it. Make it before there is a second thread.
+class OwnTemporaryDirectory {
+  public:
+    /// `name` begins the directory's name.
+    static foundation::Result<OwnTemporaryDirectory> make(const std::string& name);
+
+    OwnTemporaryDirectory(OwnTemporaryDirectory&& other) noexcept;
+    OwnTemporaryDirectory& operator=(OwnTemporaryDirectory&&) = delete;
+
+    /// Removes it if it is empty.
+    ~OwnTemporaryDirectory();
+
+    const std::string& path() const noexcept { return path_; }
+
+    /// Removes it with all that is in it.
+    void remove();
+
+    /// Whether it is not empty.
+    bool holdsFiles() const;
+
+  private:
+    explicit OwnTemporaryDirectory(std::string path) : path_(std::move(path)) {}
+
+    std::string path_;  // empty after removal or a move
 };
 
 }  // namespace pinwell::companion

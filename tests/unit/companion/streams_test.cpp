@@ -1,5 +1,5 @@
 // Lists of paths, read while the paths are processed.
-#include "companion/path_list.h"
+#include "companion/streams.h"
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
@@ -22,8 +22,8 @@ class PathLists : public testing::Test {
   protected:
     static std::vector<std::string> all(PathList& list) {
         std::vector<std::string> paths;
-        std::string path;
-        while (list.nextOrWait(path) == State::path) paths.push_back(path);
+        for (auto entry = list.nextOrWait(); entry.state == State::path; entry = list.nextOrWait())
+            paths.push_back(entry.path);
         return paths;
     }
     std::vector<std::string> read(const std::string& contents, bool isZeroTerminated = false,
@@ -77,9 +77,8 @@ TEST_F(PathLists, NameAFileThatCannotBeOpened) {
 TEST_F(PathLists, OfAFolderAreBroken) {
     auto list = PathList::open({"a"}, directory.path(), false);
     ASSERT_TRUE(list);
-    std::string path;
-    EXPECT_EQ(list->next(path), State::path);
-    EXPECT_EQ(list->next(path), State::broken);
+    EXPECT_EQ(list->next().state, State::path);
+    EXPECT_EQ(list->next().state, State::broken);
     EXPECT_TRUE(list->error());
 }
 
@@ -87,18 +86,18 @@ TEST_F(PathLists, DoNotWaitForAPipe) {
     ASSERT_EQ(::mkfifo(file.c_str(), 0600), 0);
     auto list = PathList::open({}, file, false);
     ASSERT_TRUE(list);
-    std::string path;
-    EXPECT_EQ(list->next(path), State::wait);
+    EXPECT_EQ(list->next().state, State::wait);
     {
         const foundation::FileDescriptor writer(::open(file.c_str(), O_WRONLY | O_CLOEXEC));
         ASSERT_TRUE(writer);
         ASSERT_EQ(::write(writer.get(), "a\nb", 3), 3);
-        EXPECT_EQ(list->next(path), State::path);
-        EXPECT_EQ(path, "a");
-        EXPECT_EQ(list->next(path), State::wait);
+        const auto first = list->next();
+        EXPECT_EQ(first.state, State::path);
+        EXPECT_EQ(first.path, "a");
+        EXPECT_EQ(list->next().state, State::wait);
     }
     EXPECT_THAT(all(*list), ElementsAre("b"));
-    EXPECT_EQ(list->next(path), State::end);
+    EXPECT_EQ(list->next().state, State::end);
 }
 
 }  // namespace

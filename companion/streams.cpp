@@ -1,4 +1,4 @@
-#include "companion/path_list.h"
+#include "companion/streams.h"
 
 #include <fcntl.h>
 #include <poll.h>
@@ -6,12 +6,17 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdlib>
 #include <utility>
 
 namespace pinwell::companion {
 namespace {
 
 constexpr std::size_t kListPieceSize = std::size_t{64} * 1024;
+
+bool isSet(const char* value) {
+    return value != nullptr && *value != '\0';
+}
 
 }  // namespace
 
@@ -38,27 +43,23 @@ PathList::PathList(std::vector<std::string> paths, foundation::FileDescriptor fi
       buffer_(file_ ? kListPieceSize : 0),
       ended_(!file_) {}
 
-PathList::State PathList::next(std::string& path) {
-    if (nextPath_ < paths_.size()) {
-        path = std::move(paths_[nextPath_++]);
-        return State::path;
-    }
+PathList::Entry PathList::next() {
+    if (nextPath_ < paths_.size()) return {State::path, std::move(paths_[nextPath_++])};
     while (true) {
         if (auto line = takeLine()) {
             if (line->empty()) continue;
-            path = *std::move(line);
-            return State::path;
+            return {State::path, *std::move(line)};
         }
-        if (error_) return State::broken;
-        if (ended_) return State::end;
-        if (const State state = fill(); state != State::path) return state;
+        if (error_) return {State::broken};
+        if (ended_) return {State::end};
+        if (const State state = fill(); state != State::path) return {state};
     }
 }
 
-PathList::State PathList::nextOrWait(std::string& path) {
+PathList::Entry PathList::nextOrWait() {
     while (true) {
-        const State state = next(path);
-        if (state != State::wait) return state;
+        Entry entry = next();
+        if (entry.state != State::wait) return entry;
         pollfd input{file_.get(), POLLIN, 0};
         static_cast<void>(::poll(&input, 1, -1));
     }
@@ -95,6 +96,42 @@ PathList::State PathList::fill() {
     end_ = static_cast<std::size_t>(count);
     ended_ = count == 0;
     return State::path;
+}
+
+ColorWhen colorWhenNamed(std::string_view name) noexcept {
+    if (name == "always") return ColorWhen::always;
+    if (name == "never") return ColorWhen::never;
+    return ColorWhen::automatic;
+}
+
+bool wantsColor(ColorWhen when, int descriptor) {
+    if (when != ColorWhen::automatic) return when == ColorWhen::always;
+    const char* const force = std::getenv("CLICOLOR_FORCE");
+    if (isSet(std::getenv("NO_COLOR"))) return false;
+    if (isSet(force) && std::string_view(force) != "0") return true;
+    const char* const terminal = std::getenv("TERM");
+    const bool isDumb = terminal != nullptr && std::string_view(terminal) == "dumb";
+    return ::isatty(descriptor) == 1 && !isDumb;
+}
+
+void Output::write(std::string_view text) {
+    while (!text.empty() && !closed_ && !failed_) {
+        const ssize_t written = ::write(descriptor_, text.data(), text.size());
+        if (written > 0) {
+            text.remove_prefix(static_cast<std::size_t>(written));
+            continue;
+        }
+        if (written < 0 && errno == EINTR) continue;
+        if (written < 0 && errno == EAGAIN) {
+            pollfd output{descriptor_, POLLOUT, 0};
+            static_cast<void>(::poll(&output, 1, -1));
+            continue;
+        }
+        if (written < 0 && errno == EPIPE)
+            closed_ = true;
+        else
+            failed_ = true;
+    }
 }
 
 }  // namespace pinwell::companion

@@ -1,10 +1,13 @@
-// Paths or names, read during the work: first from the command line, then from a file.
+// The input and the output of the companions.
+//
+// Input is a list of paths or names, read during the work: first from the command line, then from a file.
+// Output is whole lines, in colour only on a terminal.
 #pragma once
 
 #include <cstdint>
 #include <optional>
 #include <string>
-#include <variant>
+#include <string_view>
 #include <vector>
 
 #include "foundation/error.h"
@@ -28,11 +31,16 @@ class PathList {
         broken  // reading failed: error()
     };
 
-    /// The next path. Empty lines are skipped. Never blocks.
-    State next(std::string& path);
+    struct Entry {
+        State state = State::end;
+        std::string path{};  // empty unless the state is `path`
+    };
 
-    /// The same, but blocks if next() returns `wait`.
-    State nextOrWait(std::string& path);
+    /// The next path. Empty lines are skipped. Never blocks.
+    Entry next();
+
+    /// The same, but blocks until the state is not `wait`.
+    Entry nextOrWait();
 
     /// For `wait`: readable when there is more.
     int descriptor() const noexcept { return file_.get(); }
@@ -58,6 +66,36 @@ class PathList {
     bool ended_ = false;
     std::string line_;  // the part of the next line read so far
     std::optional<foundation::Error> error_;
+};
+
+enum class ColorWhen { automatic, always, never };
+
+/// "auto", "always" and "never", as --color has them.
+ColorWhen colorWhenNamed(std::string_view name) noexcept;
+
+/// Whether to colour the output to this descriptor. --color decides first, then NO_COLOR and CLICOLOR_FORCE
+/// (https://no-color.org, https://bixense.com/clicolors/), then whether it is a terminal.
+bool wantsColor(ColorWhen when, int descriptor);
+
+/// Standard output, or another descriptor. A closed pipe is not an error: the rest of the output is dropped.
+/// For one thread.
+class Output {
+  public:
+    explicit Output(int descriptor) : descriptor_(descriptor) {}
+
+    /// Writes the whole text, and waits for a slow reader.
+    void write(std::string_view text);
+
+    /// Whether a write failed for another reason than a closed pipe, for example a full disk.
+    bool hasFailed() const noexcept { return failed_; }
+
+    /// Whether the reader has closed the pipe.
+    bool isClosed() const noexcept { return closed_; }
+
+  private:
+    const int descriptor_;
+    bool closed_ = false;
+    bool failed_ = false;
 };
 
 }  // namespace pinwell::companion
