@@ -1,49 +1,49 @@
-// The commands of pinwell-ticket. Each prints what came of its arguments and returns the exit status.
+// The commands of pinwell-ticket and their settings. Each command prints the result of each of its arguments,
+// and returns the exit status.
 #pragma once
 
-#include <functional>
 #include <memory>
+#include <optional>
 #include <string>
+#include <vector>
 
+#include "companion/command_line.h"
 #include "companion/streams.h"
 #include "https/client_identity.h"
-#include "retrieval/report.h"
+#include "retrieval/retry_policy.h"
 #include "src/platform.h"
-#include "ticket/settings.h"
 
 namespace pinwell::ticket_files {
 
 inline constexpr const char* kProgramName = "pinwell-ticket";
 
-/// Where a command prints, and what it ends with.
-class Reporter {
-  public:
-    explicit Reporter(const Settings& settings);
+using companion::Seconds;
 
-    /// One artefact, or one record.
-    void report(const retrieval::Report& report);
+struct Settings {
+    std::vector<std::string> arguments;
 
-    /// A separate line, instead of the report of a success.
-    void line(const std::string& text, int exitStatus);
+    std::optional<std::string> from;  // for fetch and request: names, one a line; "-": standard input
+    bool isZeroTerminated = false;
+    std::optional<std::string> output;   // for fetch and request a directory, for extract a file
+    std::optional<std::string> tickets;  // for attach: the directory
+    std::optional<std::string> ticket;   // for attach: one file for all artefacts
+    retrieval::RetryPolicy retry;
+    Seconds wait{0};
+    std::optional<Seconds> deadline;
 
-    /// Something that is wrong with the whole run: said on standard error.
-    void complain(const std::string& text, int exitStatus);
+    // For request.
+    std::optional<std::string> url;
+    std::optional<std::string> certificate;
+    std::optional<std::string> key;
+    std::optional<std::string> label;
+    std::optional<std::string> comment;
+    bool reinstates = false;
 
-    /// The worst of all.
-    int exitStatus() const;
-
-  private:
-    const Settings& settings_;
-    companion::Output output_;
-    const bool inColor_;
-    int worst_ = 0;
+    bool asJson = false;
+    bool isQuiet = false;
+    bool isVerbose = false;
+    companion::ColorWhen color = companion::ColorWhen::automatic;
 };
-
-/// Does `write` for each path and reports what came of it, with a temporary directory of the command's own.
-/// It stays, and is named, if an artefact could not be written: with the copies in it, one that was cut short
-/// can be put right.
-int writeEach(const Settings& settings, Reporter& reporter,
-              const std::function<retrieval::Report(const std::string& path)>& write);
 
 /// Prints the record name of each artefact. No network.
 int hash(const Settings& settings, const Platform& platform);
@@ -51,8 +51,8 @@ int hash(const Settings& settings, const Platform& platform);
 /// Fetches the tickets of records into a directory, with an index.
 int fetch(const Settings& settings, const Platform& platform);
 
-/// Has a record service issue tickets for artefacts and keeps them in a directory, with an index. `identity`
-/// is who asks.
+/// Has a record service issue tickets for artefacts, and keeps them in a directory, with an index. `identity`
+/// is the client's.
 int request(const Settings& settings, const Platform& platform,
             std::shared_ptr<const https::ClientIdentity> identity);
 

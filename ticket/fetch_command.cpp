@@ -8,14 +8,13 @@
 #include "companion/process.h"
 #include "companion/streams.h"
 #include "retrieval/ticket_fetch.h"
-#include "ticket/artefact.h"
+#include "ticket/command_parts.h"
 #include "ticket/commands.h"
-#include "ticket/ticket_directory.h"
+#include "ticket/ticket_files.h"
 
 namespace pinwell::ticket_files {
 namespace {
 
-using retrieval::Cause;
 using retrieval::Report;
 
 /// One run of the command.
@@ -30,9 +29,7 @@ class Fetching {
         retrieval::FetchOptions options;
         options.retry = settings_.retry;
         options.wait = settings_.wait;
-        if (settings_.deadline)
-            options.deadline = retrieval::Clock::now() +
-                               std::chrono::duration_cast<retrieval::Clock::duration>(*settings_.deadline);
+        options.deadline = deadlineOf(settings_);
         {
             retrieval::Cancellation cancellation;
             const companion::SignalWatch watch(std::move(signals_), [&](int number) {
@@ -80,11 +77,7 @@ class Fetching {
                 want({}, argument);
                 continue;
             }
-            OpenedArtefact artefact = openArtefact(argument, "fetch", platform_);
-            if (artefact.file != nullptr && artefact.hash.empty()) {
-                artefact.report.exitStatus = kExitNoInput;
-                artefact.report.cause = Cause::notSigned;
-            }
+            OpenedArtefact artefact = openSignedArtefact(argument, "fetch", platform_);
             if (artefact.report.exitStatus != kExitOK) {
                 reporter_.report(artefact.report);
                 continue;
@@ -106,7 +99,7 @@ class Fetching {
         return true;
     }
 
-    // A record that is named twice is fetched once, and reported for the first that named it.
+    // A record that is named twice is fetched once, and reported for the first of its names.
     void want(Report report, const std::string& recordName) {
         if (!known_.insert(recordName).second) return;
         report.operation = "fetch";
@@ -117,12 +110,7 @@ class Fetching {
 
     void take(std::size_t number, retrieval::FetchedTicket ticket) {
         Report& report = reports_[number];
-        report.exitStatus = ticket.exitStatus;
-        report.cause = ticket.cause;
-        if (ticket.cause == Cause::interrupted) report.exitStatus = companion::kSignalBase + signal_;
-        report.attempts = ticket.attempts;
-        report.seconds = ticket.seconds;
-        report.messages = std::move(ticket.messages);
+        moveResult(ticket, signal_, report);
         if (!ticket.ticket.empty()) directory_->keep(ticket, report);
         reporter_.report(report);
         report = {};
@@ -133,10 +121,10 @@ class Fetching {
     Reporter reporter_;
     std::optional<TicketDirectory> directory_;
     foundation::FileDescriptor signals_;
-    std::atomic<int> signal_ = 0;  // the one that has come
+    std::atomic<int> signal_ = 0;  // the signal that ended the run
     std::set<std::string> known_;
     std::vector<std::string> names_;
-    std::vector<Report> reports_;  // one a name
+    std::vector<Report> reports_;  // one for each name
 };
 
 }  // namespace

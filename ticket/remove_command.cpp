@@ -1,24 +1,74 @@
+// The command that removes tickets.
 #include "foundation/format.h"
 #include "retrieval/artefact_run.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
+#include "src/PWHashedFile/PWHashedFlatPackage.h"
+#include "src/PWHashedFile/package_trailer.h"
 #include "src/messages.h"
 #include "src/run.h"
-#include "ticket/artefact.h"
+#include "ticket/command_parts.h"
 #include "ticket/commands.h"
-#include "ticket/removable_package.h"
 
 namespace pinwell::ticket_files {
 namespace {
 
 using retrieval::Cause;
 
-// What takes the ticket away.
+// A flat package whose terminator is removed with the ticket, if no other trailer needs it. The package is
+// then as before its first staple, and can be stapled again. If the terminator stayed alone, the next ticket
+// would be written over the package from its first byte on. Trailers of other types stay, and the terminator
+// with them.
+class RemovablePackage : public PWHashedFlatPackage {
+  public:
+    using PWHashedFlatPackage::PWHashedFlatPackage;
+
+    bool _writeNewTicketDataFromURL(const std::optional<URL>& source, const URL& target, bool deleteExisting,
+                                    ErrorOut error) override;
+
+  private:
+    bool cutTerminatorToo(files::FileHandle& file) const;
+};
+
+bool RemovablePackage::_writeNewTicketDataFromURL(const std::optional<URL>& source, const URL& target,
+                                                  bool deleteExisting, ErrorOut error) {
+    if (deleteExisting && ticketData()) {
+        try {
+            const auto opened = platform().files.openForUpdating(target);
+            if (opened && cutTerminatorToo(**opened)) {
+                setAppropriateExitCode(kExitOK);
+                return true;
+            }
+        } catch (const files::FileHandleError& failure) {
+            NoisyLog("Fatal error while deleting existing ticket to %@. %@.", target.path(), failure.what());
+            return failedToWrite(std::nullopt, error);
+        }
+    }
+    return PWHashedFlatPackage::_writeNewTicketDataFromURL(source, target, deleteExisting, error);
+}
+
+// Returns false, and writes nothing, if the archive is followed by more than the terminator and the ticket.
+// Cuts once: if the process dies, either both are there or none.
+bool RemovablePackage::cutTerminatorToo(files::FileHandle& file) const {
+    if (dataToAppend() || ticketStart() < kTrailerSize) return false;
+    const std::uint64_t terminator = ticketStart() - kTrailerSize;
+    file.seek(terminator);
+    trailer_header record;
+    if (!trailer_data_is_valid(file.read(kTrailerSize), &record) ||
+        !trailer_is_terminator(record.firstWord(), record.length()))
+        return false;
+    file.truncate(terminator);
+    file.synchronize();
+    file.close();
+    return true;
+}
+
+// The object that removes the ticket.
 std::shared_ptr<PWHashedFile> remover(const std::shared_ptr<PWHashedFile>& file, const Platform& platform) {
     if (retrieval::kindOf(*file) != retrieval::Kind::package) return file;
     return std::make_shared<RemovablePackage>(file->fileURL(), platform);
 }
 
-// False if the deletion failed; the error says why where that is known.
+// Returns false if the deletion failed, and sets the error if the reason is known.
 bool deleteTicket(PWHashedFile& file, std::optional<Error>& error) {
     if (auto* const bundle = dynamic_cast<PWHashedBundle*>(&file)) return bundle->_deleteExistingTicket();
     return file._deleteExistingTicket(&error) && !error;
@@ -49,13 +99,13 @@ retrieval::Report removeTicket(const std::string& path, const Platform& platform
         return end(kExitCannotCreate, file->wasRefusedAsChanged() ? Cause::changed : Cause::notWritable,
                    error ? foundation::format("The ticket of %@ could not be removed. %@", name, error)
                          : foundation::format("The ticket of %@ could not be removed.", name));
-    // From the disk, by a new object.
+    // Reads the result from the disk, with a new object.
     const auto fresh = PWHashedFile::initWithFileURL(URL::fileURLWithPath(path), platform);
     if (fresh == nullptr || fresh->appropriateExitCode() != kExitOK)
         return end(kExitCannotCreate, Cause::notWritable,
                    foundation::format("%@ cannot be read any more. Please restore it from backup.", name));
     if (fresh->ticketData()) {
-        // Known of disk images: without the ticket there would be no signature left, and none is taken away.
+        // A disk image whose signature holds only the ticket: a signature is never removed.
         return end(
             kExitOK, Cause::worked,
             foundation::format("The ticket of %@ is all that its signature holds: it stays in place.", name));

@@ -12,9 +12,9 @@
 #include "retrieval/ticket_request.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/code_hashes.h"
-#include "ticket/artefact.h"
+#include "ticket/command_parts.h"
 #include "ticket/commands.h"
-#include "ticket/ticket_directory.h"
+#include "ticket/ticket_files.h"
 
 namespace pinwell::ticket_files {
 namespace {
@@ -22,7 +22,7 @@ namespace {
 using retrieval::Cause;
 using retrieval::Report;
 
-// A ticket of 16 MiB, its certificates, in base64, and what is around it.
+// A ticket of 16 MiB and its certificates, in base64, and the JSON around them.
 constexpr std::size_t kLargestAnswer = std::size_t{24} * 1024 * 1024;
 
 constexpr std::string_view kOperation = "request";
@@ -39,7 +39,7 @@ class Requesting {
                std::shared_ptr<const https::ClientIdentity> identity)
         : settings_(settings),
           platform_(platform),
-          // Elsewhere the request would not have the same meaning, and the client need not be known.
+          // After a redirect the request could have another meaning, and another server would learn who asks.
           sessions_(https::makeSessionService(platform.trust, {.maximumResponseBody = kLargestAnswer,
                                                                .maximumRedirects = 0,
                                                                .keepsConnection = true,
@@ -68,10 +68,8 @@ class Requesting {
     }
 
     void requestAll(companion::PathList& list) {
-        retrieval::RequestOptions options{*retrieval::serviceURLOf(*settings_.url), settings_.retry, {}};
-        if (settings_.deadline)
-            options.deadline = retrieval::Clock::now() +
-                               std::chrono::duration_cast<retrieval::Clock::duration>(*settings_.deadline);
+        retrieval::RequestOptions options{*retrieval::serviceURLOf(*settings_.url), settings_.retry,
+                                          deadlineOf(settings_)};
         foundation::FileDescriptor signals = companion::takeEndingSignals();
         retrieval::Cancellation cancellation;
         const companion::SignalWatch watch(std::move(signals), [&](int number) {
@@ -107,12 +105,8 @@ class Requesting {
     }
 
     void requestFor(const std::string& path, retrieval::TicketRequests& requests) {
-        OpenedArtefact artefact = openArtefact(path, kOperation, platform_);
+        OpenedArtefact artefact = openSignedArtefact(path, kOperation, platform_);
         Report& report = artefact.report;
-        if (artefact.file != nullptr && artefact.hash.empty()) {
-            report.exitStatus = EX_NOINPUT;
-            report.cause = Cause::notSigned;
-        }
         if (report.exitStatus != EX_OK) return reporter_.report(report);
         // Two artefacts with one record have one ticket.
         if (!known_.insert(report.recordName).second) return;
@@ -133,12 +127,7 @@ class Requesting {
 
     void take(retrieval::RequestedTicket& requested, Report& report) {
         retrieval::FetchedTicket& ticket = requested.fetched;
-        report.exitStatus = ticket.exitStatus;
-        report.cause = ticket.cause;
-        if (ticket.cause == Cause::interrupted) report.exitStatus = companion::kSignalBase + signal_;
-        report.attempts = ticket.attempts;
-        report.seconds = ticket.seconds;
-        report.messages = std::move(ticket.messages);
+        moveResult(ticket, signal_, report);
         if (ticket.ticket.empty()) return;
         report.action = requested.action;
         report.event = requested.event;
@@ -152,8 +141,8 @@ class Requesting {
     const std::unique_ptr<https::SessionService> sessions_;
     Reporter reporter_;
     std::optional<TicketDirectory> directory_;
-    std::atomic<int> signal_ = 0;  // the one that has come
-    std::set<std::string> known_;  // records that were asked for
+    std::atomic<int> signal_ = 0;  // the signal that ended the run
+    std::set<std::string> known_;  // the requested records
 };
 
 }  // namespace

@@ -1,16 +1,67 @@
-// The index of a directory of tickets.
-#include "ticket/index.h"
+// New files, files that take the place of others, and the index of a directory of tickets.
+#include "ticket/ticket_files.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+
+#include <cerrno>
+#include <filesystem>
 
 #include "support/temporary_directory.h"
 
 namespace pinwell::test {
 namespace {
 
+using foundation::asBytes;
 using ticket_files::Index;
 using ticket_files::IndexEntry;
+using ticket_files::replaceFile;
+using ticket_files::writeNewFile;
+
+class TicketFiles : public testing::Test {
+  protected:
+    std::size_t filesThere() const {
+        return static_cast<std::size_t>(
+            std::distance(std::filesystem::directory_iterator(directory.path()), {}));
+    }
+    TemporaryDirectory directory;
+    const std::string file = directory / "file";
+};
+
+TEST_F(TicketFiles, ThatAreNewOverwriteNothing) {
+    ASSERT_TRUE(writeNewFile(asBytes("one"), file));
+    EXPECT_EQ(readFile(file), "one");
+    const auto again = writeNewFile(asBytes("two"), file);
+    ASSERT_FALSE(again);
+    EXPECT_EQ(again.error().code(), EEXIST);
+    EXPECT_EQ(readFile(file), "one");
+}
+
+TEST_F(TicketFiles, ThatAreNewFollowNoLink) {
+    std::filesystem::create_symlink("nowhere", file);
+    EXPECT_FALSE(writeNewFile(asBytes("one"), file));
+    EXPECT_FALSE(std::filesystem::exists(directory / "nowhere"));
+}
+
+TEST_F(TicketFiles, ReplaceAnExistingFileAndNotALinksTarget) {
+    writeFile(directory / "precious", "precious");
+    std::filesystem::create_symlink("precious", file);
+    ASSERT_TRUE(replaceFile(asBytes("one"), file));
+    EXPECT_EQ(readFile(file), "one");
+    EXPECT_EQ(readFile(directory / "precious"), "precious");
+    EXPECT_EQ(filesThere(), 2U);
+}
+
+TEST_F(TicketFiles, LeaveNothingWhenTheyCannotBeWritten) {
+    writeFile(file, "old");
+    std::filesystem::create_directory(directory / "folder");
+    writeFile(directory / "folder/inside", "x");
+    EXPECT_FALSE(replaceFile(asBytes("new"), directory / "folder"));
+    EXPECT_FALSE(replaceFile(asBytes("new"), directory / "no/such"));
+    EXPECT_FALSE(writeNewFile(asBytes("new"), directory / "no/such"));
+    EXPECT_EQ(readFile(file), "old");
+    EXPECT_EQ(filesThere(), 2U);
+}
 
 const IndexEntry kEntry{
     .file = "2-2-ab.ticket", .sha256 = "00", .fetched = "2026-11-22T02:38:50Z", .revoked = false};
