@@ -10,6 +10,7 @@
 #include <stdexcept>
 #include <string>
 #include <string_view>
+#include <utility>
 
 #include "foundation/bytes.h"
 #include "support/fake_code_signing.h"
@@ -62,10 +63,10 @@ class HashByExecutable : public FakeCodeSigningService {
         const codesign::StaticCode& code, std::uint32_t) const override {
         const std::string hash = readFile(dynamic_cast<const Code&>(code).path + "/Contents/MacOS/App");
         if (hash == kRaises) throw std::runtime_error("nobody has thought of this");
-        std::optional<codesign::SigningInformation> information(std::in_place);
-        information->unique = foundation::toData(hash);
-        information->digestAlgorithm = 2;
-        return information;
+        codesign::SigningInformation found;
+        found.unique = foundation::toData(hash);
+        found.digestAlgorithm = 2;
+        return std::optional(std::move(found));
     }
 
   private:
