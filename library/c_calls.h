@@ -1,16 +1,45 @@
-// The boundary of the C interface: checks every argument, and lets no exception out, only a status. For this
-// folder only.
+// The boundary of the C interface: its failures are exceptions inside and statuses outside. Every argument is
+// checked here. For this folder only.
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <exception>
 #include <new>
 #include <string>
+#include <utility>
 
-#include "library/failure.h"
+#include "foundation/error.h"
+#include "pinwell/ticket.h"
 #include "pinwell/ticket_c.h"
 
 namespace pinwell::library {
+
+/// A failed call. Thrown inside, and caught by guarded().
+struct Failure {
+    pinwell_status status = PINWELL_ERROR_INTERNAL;
+    std::string message;
+    int systemError = 0;
+    std::uint64_t offset = 0;
+};
+
+inline Failure invalid(std::string message) {
+    return {PINWELL_ERROR_ARGUMENT, std::move(message)};
+}
+
+/// Converts an error of the C++ interface about a file.
+inline Failure failureOf(const ticket::Error& error) {
+    const bool isMalformed = error.code == ticket::ErrorCode::malformed;
+    return {isMalformed ? PINWELL_ERROR_MALFORMED : PINWELL_ERROR_UNREADABLE, error.message,
+            error.systemError, error.offset};
+}
+
+/// Converts an error of the services about a file.
+inline Failure failureOf(const foundation::Error& error) {
+    const std::string& reason = error.localizedFailureReason();
+    return {PINWELL_ERROR_UNREADABLE, reason.empty() ? error.localizedDescription() : reason,
+            error.domain() == foundation::kPOSIXErrorDomain ? static_cast<int>(error.code()) : 0};
+}
 
 /// While it lives, the calling thread cannot be cancelled: cancellation would unwind through a C function.
 class Uncancelled {

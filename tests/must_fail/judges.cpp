@@ -6,7 +6,7 @@
 #include "gate/case.h"
 #include "inspect/gather.h"
 #include "library/assessment.h"
-#include "library/failure.h"
+#include "library/c_calls.h"
 #include "src/messages.h"
 #include "support/certificate_builder.h"
 
