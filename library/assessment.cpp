@@ -228,8 +228,8 @@ LocatedTicket ticketOfBundle(PWHashedBundle& bundle, files::FileManager& files) 
 
 template <class Artefact>
 LocatedTicket ticketOfFile(ticket::Result<Artefact> read, const std::string& path) {
-    if (const auto* const error = std::get_if<ticket::Error>(&read)) throw failureOf(*error);
-    auto& found = std::get<Artefact>(read).ticket;
+    if (!read) throw failureOf(read.error());
+    auto& found = read->ticket;
     if (!found || found->bytes.empty()) throw Failure{PINWELL_ERROR_NO_TICKET, kNoTicket};
     return {std::move(found->bytes), path, found->range.offset};
 }

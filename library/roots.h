@@ -5,7 +5,7 @@
 #include "trust/anchors.h"
 
 namespace pinwell::ticket {
-inline namespace v0 {
+inline namespace v1 {
 
 struct TrustedRoots::Contents {
     trust::Anchors anchors;
@@ -18,5 +18,5 @@ struct TrustedRootsAccess {
     }
 };
 
-}  // namespace v0
+}  // namespace v1
 }  // namespace pinwell::ticket

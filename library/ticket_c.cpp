@@ -184,10 +184,8 @@ pinwell_status pinwell_roots_from_certificates(const void* bytes, size_t length,
             throw invalid("the length is out of range");
         const auto* const first = static_cast<const std::byte*>(bytes);
         auto made = pinwell::ticket::TrustedRoots::fromCertificates({first, length});
-        if (const auto* const refusal = std::get_if<pinwell::ticket::Error>(&made))
-            throw Failure{PINWELL_ERROR_NO_CERTIFICATES, refusal->message};
-        *roots = Roots::shared().add(std::make_shared<const pinwell::ticket::TrustedRoots>(
-            std::get<pinwell::ticket::TrustedRoots>(std::move(made))));
+        if (!made) throw Failure{PINWELL_ERROR_NO_CERTIFICATES, made.error().message};
+        *roots = Roots::shared().add(std::make_shared<const pinwell::ticket::TrustedRoots>(*std::move(made)));
     });
 }
 

@@ -1,26 +1,31 @@
-// Judges a ticket. satchel_get_validated_tm_ticket decides, as in the tool, and explain_ticket.h says why it
-// refuses.
+// Judges a ticket with the caller's roots. satchel_get_validated_tm_ticket decides, as in the tool, and
+// explain_ticket.h says why it refuses.
 #include <algorithm>
 #include <utility>
 
 #include "foundation/date.h"
+#include "foundation/platform_directory.h"
 #include "library/roots.h"
 #include "src/explain_ticket.h"
 #include "src/tm_ticket.h"
+#include "trust/certificate.h"
 #include "trust/trust_service.h"
 
 namespace pinwell::ticket {
-inline namespace v0 {
+inline namespace v1 {
 namespace {
 
-constexpr auto numberOf = [](trust::Verdict verdict) { return static_cast<std::uint32_t>(verdict); };
-static_assert(kVerdictNone == numberOf(trust::Verdict::invalid));
-static_assert(kVerdictProceed == numberOf(trust::Verdict::proceed));
-static_assert(kVerdictDeny == numberOf(trust::Verdict::deny));
-static_assert(kVerdictUnspecified == numberOf(trust::Verdict::unspecified));
-static_assert(kVerdictRecoverableFailure == numberOf(trust::Verdict::recoverableFailure));
-static_assert(kVerdictFatalFailure == numberOf(trust::Verdict::fatalFailure));
-static_assert(kVerdictOtherError == numberOf(trust::Verdict::otherError));
+/// The numbers of the trust service and of the interface are the same.
+constexpr Verdict verdictOf(trust::Verdict verdict) {
+    return static_cast<Verdict>(verdict);
+}
+static_assert(verdictOf(trust::Verdict::invalid) == Verdict::none);
+static_assert(verdictOf(trust::Verdict::proceed) == Verdict::proceed);
+static_assert(verdictOf(trust::Verdict::deny) == Verdict::deny);
+static_assert(verdictOf(trust::Verdict::unspecified) == Verdict::unspecified);
+static_assert(verdictOf(trust::Verdict::recoverableFailure) == Verdict::recoverableFailure);
+static_assert(verdictOf(trust::Verdict::fatalFailure) == Verdict::fatalFailure);
+static_assert(verdictOf(trust::Verdict::otherError) == Verdict::otherError);
 
 Step stepOf(RefusalStep step) {
     switch (step) {
@@ -50,11 +55,43 @@ Validation refused(TicketRefusal refusal) {
     validation.step = stepOf(refusal.step);
     validation.offset = refusal.offset;
     validation.reason = std::move(refusal.reason);
-    validation.verdict = numberOf(refusal.verdict);
+    validation.verdict = verdictOf(refusal.verdict);
     return validation;
 }
 
 }  // namespace
+
+TrustedRoots::TrustedRoots(std::shared_ptr<const Contents> contents) noexcept
+    : contents_(std::move(contents)) {}
+
+Result<TrustedRoots> TrustedRoots::fromCertificates(ByteView pemOrDer) {
+    Contents contents;
+    if (auto certificate = trust::X509Certificate::parse(pemOrDer)) {
+        contents.anchors.roots.push_back(std::move(certificate));
+    } else if (auto list = trust::readPem(pemOrDer)) {
+        contents.anchors.roots = *std::move(list);
+    } else {
+        return Error{ErrorCode::noCertificates, 0, 0,
+                     "these are neither certificates in PEM nor one certificate in DER"};
+    }
+    return TrustedRoots(std::make_shared<const Contents>(std::move(contents)));
+}
+
+TrustedRoots TrustedRoots::fromPlatformDirectory(const std::string& path) {
+    auto contents = std::make_shared<Contents>();
+    contents->anchors = trust::loadAnchors(foundation::PlatformDirectory(path), [&](std::string_view line) {
+        contents->problems.emplace_back(line);
+    });
+    return TrustedRoots(std::move(contents));
+}
+
+const std::vector<std::string>& TrustedRoots::problems() const noexcept {
+    return contents_->problems;
+}
+
+std::size_t TrustedRoots::size() const noexcept {
+    return contents_->anchors.roots.size();
+}
 
 Validation validate(ByteView ticket, const TrustedRoots& roots, std::int64_t evaluationTime,
                     std::span<const ByteView> cdhashes) {
@@ -68,12 +105,12 @@ Validation validate(ByteView ticket, const TrustedRoots& roots, std::int64_t eva
     const tm_ticket_ptr genuine(decoded);
     Validation validation;
     validation.isGenuine = true;
-    validation.verdict = kVerdictUnspecified;
+    validation.verdict = Verdict::unspecified;
     validation.isRevoked = (tm_ticket_get_flags(genuine.get()) & kTicketRevoked) != 0;
     validation.isListed = std::ranges::any_of(
         cdhashes, [&](ByteView cdhash) { return tm_ticket_lists_cdhash(genuine.get(), cdhash); });
     return validation;
 }
 
-}  // namespace v0
+}  // namespace v1
 }  // namespace pinwell::ticket

@@ -57,11 +57,11 @@ std::optional<ticket::Bytes> fromHex(std::string_view text) {
 /// The ticket in an image or a package; says why there is none.
 template <class Artefact>
 std::optional<ticket::Bytes> ticketOf(ticket::Result<Artefact> result) {
-    if (const auto* const error = std::get_if<ticket::Error>(&result)) {
-        std::cout << "unreadable at " << error->offset << ": " << error->message << "\n";
+    if (!result) {
+        std::cout << "unreadable at " << result.error().offset << ": " << result.error().message << "\n";
         return std::nullopt;
     }
-    auto& found = std::get<Artefact>(result).ticket;
+    auto& found = result->ticket;
     if (!found) {
         std::cout << "no ticket\n";
         return std::nullopt;
@@ -82,22 +82,20 @@ std::optional<ticket::Bytes> ticketAt(const std::string& path) {
 std::optional<ticket::TrustedRoots> rootsAt(const std::string& path) {
     if (std::filesystem::is_directory(path)) return ticket::TrustedRoots::fromPlatformDirectory(path);
     auto result = ticket::TrustedRoots::fromCertificates(readWhole(path).value_or(ticket::Bytes{}));
-    if (const auto* const error = std::get_if<ticket::Error>(&result)) {
-        std::cout << "no roots: " << error->message << "\n";
+    if (!result) {
+        std::cout << "no roots: " << result.error().message << "\n";
         return std::nullopt;
     }
-    return std::get<ticket::TrustedRoots>(std::move(result));
+    return *std::move(result);
 }
 
 void show(const ticket::Bytes& bytes) {
-    const auto decoded = ticket::decodeContainer(bytes);
-    const auto* const container = std::get_if<ticket::Container>(&decoded);
-    if (container == nullptr) return;
+    const auto container = ticket::decodeContainer(bytes);
+    if (!container) return;
     std::cout << "version " << container->version << ", " << container->certificates.size()
               << " certificates\n";
-    const auto read = ticket::decodePayload(container->payload);
-    const auto* const payload = std::get_if<ticket::Payload>(&read);
-    if (payload == nullptr) return;
+    const auto payload = ticket::decodePayload(container->payload);
+    if (!payload) return;
     for (std::uint64_t i = 0; i < payload->entryCount; ++i)
         if (const auto entry = ticket::entryAt(*payload, i))
             std::cout << "lists " << entry->algorithm << "/" << toHex(entry->hash) << "\n";
@@ -121,7 +119,7 @@ int main(int count, char** arguments) {
     const auto validation = ticket::validate(*bytes, *roots, std::time(nullptr), wanted);
     if (!validation.isGenuine) {
         std::cout << "not genuine: " << validation.reason << " (offset " << validation.offset << ", verdict "
-                  << validation.verdict << ")\n";
+                  << static_cast<std::uint32_t>(validation.verdict) << ")\n";
         return kNotAcceptable;
     }
     std::cout << "genuine" << (validation.isRevoked ? ", revoked" : "");

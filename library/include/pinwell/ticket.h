@@ -4,11 +4,10 @@
 //   namespace ticket = pinwell::ticket;
 //   const auto roots = ticket::TrustedRoots::fromPlatformDirectory("/etc/pinwell/platform");
 //   const auto image = ticket::readDiskImage("Sample.dmg");
-//   if (const auto* error = std::get_if<ticket::Error>(&image)) ...   // no disk image: error->message
-//   const auto* found = std::get_if<ticket::DiskImage>(&image);
-//   if (found->ticket) {
-//       const auto verdict = ticket::validate(found->ticket->bytes, roots, time(nullptr), cdhashes);
-//       if (verdict.isAcceptable()) ...
+//   if (!image) ...   // no disk image: image.error().message
+//   if (image->ticket) {
+//       const auto validation = ticket::validate(image->ticket->bytes, roots, time(nullptr), cdhashes);
+//       if (validation.isAcceptable()) ...
 //   }
 //
 // Shapes. Offsets and lengths are in bytes. Offsets into a ticket, a container or a payload count from the
@@ -19,11 +18,12 @@
 // it is not closed, and its position is neither used nor moved.
 //
 // Errors. Bad input gives a result, never an exception: a `Result` holds an `Error` instead of its value, a
-// `Validation` holds the reason. std::bad_alloc is the only exception that leaves the library. No number from
-// the input sizes an allocation, so only an input that is really that large can cause it. A returned ticket
-// has at most 64 MiB, a payload at most 16 MiB; superblobs and other trailers may have any length. Messages
-// are one line, in English, for people; programs use the codes. In a message, text from the input, such as
-// the name of a certificate, has its control characters escaped.
+// `Validation` holds the reason. std::bad_alloc is the only exception that leaves the library;
+// Result::value(), which is compiled into the caller, throws BadResultAccess. No number from the input sizes
+// an allocation, so only an input that is really that large can cause std::bad_alloc. A returned ticket has
+// at most 64 MiB, a payload at most 16 MiB; superblobs and other trailers may have any length. Messages are
+// one line, in English, for people; programs use the codes. In a message, text from the input, such as the
+// name of a certificate, has its control characters escaped.
 //
 // Threads. The library has no visible state. Any number of threads may call every function at once, and the
 // const members of one object too. It prints nothing, reads no environment variable (libcrypto, which it
@@ -33,11 +33,12 @@
 // ticket-signing policy is used.
 //
 // Versions. PINWELL_TICKET_VERSION is the version of this interface; it goes with the library's name,
-// libpinwell-ticket.so.0. As long as that name stays, these declarations keep their meaning and their layout;
+// libpinwell-ticket.so.1. As long as that name stays, these declarations keep their meaning and their layout;
 // a higher minor version only adds functions, types and enumerators. Treat an unknown enumerator as a refusal
-// of an unknown kind. A breaking change gets a new name (libpinwell-ticket.so.1) and a new inline namespace,
-// so that both can be loaded side by side. The interface takes and returns types of the standard library: use
-// the C++ library that this one was built with.
+// of an unknown kind. A breaking change gets a new name (libpinwell-ticket.so.2) and a new inline namespace,
+// so that both can be loaded side by side. Version 1.0 gave `Result` the members of std::expected, and
+// verdicts and types of trailers their enumerations. The interface takes and returns types of the standard
+// library: use the C++ library that this one was built with.
 //
 // <pinwell/ticket_c.h> is the other interface of the library, for C and languages that call C. It judges
 // whole artefacts and verifies them down to every byte.
@@ -48,7 +49,9 @@
 #include <memory>
 #include <optional>
 #include <span>
+#include <stdexcept>
 #include <string>
+#include <utility>
 #include <variant>
 #include <vector>
 
@@ -57,7 +60,7 @@
 #define PINWELL_TICKET_API __attribute__((visibility("default")))
 
 namespace pinwell::ticket {
-inline namespace v0 {
+inline namespace v1 {
 
 /// The PINWELL_TICKET_VERSION of the loaded library: never lower than the version compiled with.
 PINWELL_TICKET_API std::uint32_t version() noexcept;
@@ -84,9 +87,74 @@ struct Error {
     std::string message;
 };
 
-/// Either the value or the reason why there is none.
+/// Thrown by Result::value(). Its what() is the message of the error.
+class PINWELL_TICKET_API BadResultAccess : public std::runtime_error {
+  public:
+    explicit BadResultAccess(Error error) : std::runtime_error(error.message), error_(std::move(error)) {}
+
+    const Error& error() const noexcept { return error_; }
+
+  private:
+    Error error_;
+};
+
+/// Either a value or the reason why there is none, with the vocabulary of std::expected. It owns its content,
+/// and copies and moves it. After a move it still holds a value or an error, which has been moved from. Any
+/// number of threads may read a result; a thread that changes it needs it alone.
 template <class T>
-using Result = std::variant<T, Error>;
+class [[nodiscard]] Result {
+  public:
+    using value_type = T;
+    using error_type = Error;
+
+    Result(T value) : content_(std::in_place_index<0>, std::move(value)) {}      // NOLINT: implicit by design
+    Result(Error error) : content_(std::in_place_index<1>, std::move(error)) {}  // NOLINT: implicit by design
+
+    bool has_value() const noexcept { return content_.index() == 0; }
+    explicit operator bool() const noexcept { return has_value(); }
+
+    // Undefined without a value. References are valid as long as the result.
+    T& operator*() & noexcept { return *std::get_if<0>(&content_); }
+    const T& operator*() const& noexcept { return *std::get_if<0>(&content_); }
+    T&& operator*() && noexcept { return std::move(*std::get_if<0>(&content_)); }
+    T* operator->() noexcept { return std::get_if<0>(&content_); }
+    const T* operator->() const noexcept { return std::get_if<0>(&content_); }
+
+    // Throw BadResultAccess without a value.
+    T& value() & {
+        requireValue();
+        return **this;
+    }
+    const T& value() const& {
+        requireValue();
+        return **this;
+    }
+    T&& value() && {
+        requireValue();
+        return *std::move(*this);
+    }
+
+    /// The value, or else `otherwise` as a T.
+    template <class Otherwise>
+    T value_or(Otherwise&& otherwise) const& {
+        return has_value() ? **this : static_cast<T>(std::forward<Otherwise>(otherwise));
+    }
+    template <class Otherwise>
+    T value_or(Otherwise&& otherwise) && {
+        return has_value() ? *std::move(*this) : static_cast<T>(std::forward<Otherwise>(otherwise));
+    }
+
+    // Undefined with a value.
+    const Error& error() const& noexcept { return *std::get_if<1>(&content_); }
+    Error&& error() && noexcept { return std::move(*std::get_if<1>(&content_)); }
+
+  private:
+    void requireValue() const {
+        if (!has_value()) throw BadResultAccess(error());
+    }
+
+    std::variant<T, Error> content_;
+};
 
 // A ticket taken apart. None of these functions checks whether the ticket is genuine.
 
@@ -167,14 +235,16 @@ enum class Step : std::uint32_t {
     memory = 7,        // not enough memory to judge it
 };
 
-/// Numbers of Validation::verdict.
-inline constexpr std::uint32_t kVerdictNone = 0;                // the chain was not judged
-inline constexpr std::uint32_t kVerdictProceed = 1;             // only the user trusts it: not enough
-inline constexpr std::uint32_t kVerdictDeny = 3;                // the user distrusts a certificate in it
-inline constexpr std::uint32_t kVerdictUnspecified = 4;         // trusted: the verdict of a genuine ticket
-inline constexpr std::uint32_t kVerdictRecoverableFailure = 5;  // a check of the policy failed
-inline constexpr std::uint32_t kVerdictFatalFailure = 6;        // bad signature, unhandled critical extension
-inline constexpr std::uint32_t kVerdictOtherError = 7;          // the policy has an unknown option
+/// The result of a chain's evaluation.
+enum class Verdict : std::uint32_t {
+    none = 0,                // the chain was not judged
+    proceed = 1,             // only the user trusts it: not enough
+    deny = 3,                // the user distrusts a certificate in it
+    unspecified = 4,         // trusted: the verdict of a genuine ticket
+    recoverableFailure = 5,  // a check of the policy failed
+    fatalFailure = 6,        // bad signature, unhandled critical extension
+    otherError = 7,          // the policy has an unknown option
+};
 
 struct Validation {
     /// Well formed, with a trusted chain, and signed by it. The other members have no meaning if this is
@@ -195,8 +265,8 @@ struct Validation {
     std::uint64_t offset = 0;
     std::string reason;
 
-    /// The result of the chain's evaluation.
-    std::uint32_t verdict = kVerdictNone;
+    /// The result of the chain's evaluation, genuine or not.
+    Verdict verdict = Verdict::none;
 };
 
 /// Judges the bytes of a whole ticket at `evaluationTime`, in seconds since 1970-01-01 00:00:00 UTC. Time
@@ -240,12 +310,15 @@ struct DiskImage {
 PINWELL_TICKET_API Result<DiskImage> readDiskImage(const std::string& path);
 PINWELL_TICKET_API Result<DiskImage> readDiskImage(int descriptor);
 
-inline constexpr std::uint16_t kTrailerTerminator = 1;
-inline constexpr std::uint16_t kTrailerTicket = 2;
+/// The type of a trailer. A file may have any other number here too.
+enum class TrailerType : std::uint16_t {
+    terminator = 1,  // the first trailer, next to the archive
+    ticket = 2,
+};
 
 /// A trailer record and the data before it.
 struct Trailer {
-    std::uint16_t type = 0;
+    TrailerType type{};
     std::uint64_t recordOffset = 0;  // 16 bytes
     Range data;
 };
@@ -258,11 +331,11 @@ struct FlatPackage {
     std::optional<FoundTicket> ticket;
 };
 
-/// The trailers of a flat package, from the end of the file to the ticket or to the end of the chain. A damaged
-/// record before the ticket is found is malformed. A file without a trailer at its end counts as a package
-/// without a ticket: the archive itself is not checked.
+/// The trailers of a flat package, from the end of the file to the ticket or to the end of the chain. A
+/// damaged record before the ticket is found is malformed. A file without a trailer at its end counts as a
+/// package without a ticket: the archive itself is not checked.
 PINWELL_TICKET_API Result<FlatPackage> readFlatPackage(const std::string& path);
 PINWELL_TICKET_API Result<FlatPackage> readFlatPackage(int descriptor);
 
-}  // namespace v0
+}  // namespace v1
 }  // namespace pinwell::ticket

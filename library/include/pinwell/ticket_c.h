@@ -49,7 +49,8 @@
  * ticket-signing policy of that library if it exists. libcrypto has environment variables of its own.
  *
  * Versions. A symbol has the version of the interface that added it: PINWELL_TICKET_0.2 and so on. As long as the
- * library is called libpinwell-ticket.so.0, these declarations do not change.
+ * library is called libpinwell-ticket.so.1, these declarations do not change. They are those of version 0.2: the new
+ * name comes from the interface for C++.
  */
 #ifndef PINWELL_TICKET_C_H
 #define PINWELL_TICKET_C_H

@@ -19,12 +19,13 @@ using ticket::ByteView;
 using ticket::Step;
 using ticket::TrustedRoots;
 using ticket::Validation;
+using ticket::Verdict;
 
 constexpr std::int64_t kNow = 1'795'000'000;            // 2026-11-18
 constexpr std::int64_t kAfterEveryone = 2'840'140'800;  // 2060-01-01
 
 TrustedRoots rootsOf(ByteView pemOrDer) {
-    return std::get<TrustedRoots>(TrustedRoots::fromCertificates(pemOrDer));
+    return TrustedRoots::fromCertificates(pemOrDer).value();
 }
 
 class Judging : public testing::Test {
@@ -59,7 +60,7 @@ TEST_F(Judging, AcceptsAGenuineTicketThatListsTheArtefact) {
     EXPECT_FALSE(validation.isRevoked);
     EXPECT_TRUE(validation.isAcceptable());
     EXPECT_EQ(validation.step, Step::none);
-    EXPECT_EQ(validation.verdict, ticket::kVerdictUnspecified);
+    EXPECT_EQ(validation.verdict, Verdict::unspecified);
     EXPECT_EQ(validation.reason, "");
 }
 
@@ -107,7 +108,7 @@ TEST_F(Judging, RefusesACertificateThatCannotBeRead) {
         judge(SatchelBuilder().certificate(derElementOfSize(200)).payload(payload).signedBy(chain.leaf.key));
     expectRefusal(validation, Step::certificates, 16 + 3);
     EXPECT_EQ(validation.reason, "certificate 1 cannot be read");
-    EXPECT_EQ(validation.verdict, ticket::kVerdictNone);
+    EXPECT_EQ(validation.verdict, Verdict::none);
 }
 
 TEST_F(Judging, RefusesAChainThatEndsInNoTrustedRoot) {
@@ -115,7 +116,7 @@ TEST_F(Judging, RefusesAChainThatEndsInNoTrustedRoot) {
         {.subject = commonName("Stranger"), .key = SigningKey::cached(KeyKind::p256, "stranger")}, nullptr);
     const Validation validation = ticket::validate(sound, rootsOf(stranger.der), kNow);
     EXPECT_EQ(validation.step, Step::chain);
-    EXPECT_EQ(validation.verdict, ticket::kVerdictRecoverableFailure);
+    EXPECT_EQ(validation.verdict, Verdict::recoverableFailure);
     EXPECT_FALSE(validation.reason.empty());
 }
 
@@ -126,7 +127,7 @@ TEST_F(Judging, NamesTheCertificateThatThePolicyRefuses) {
     const Validation validation =
         ticket::validate(SatchelBuilder::of(weak, payload).build(), rootsOf(weak.root.der), kNow);
     expectRefusal(validation, Step::chain, 16 + 4);
-    EXPECT_EQ(validation.verdict, ticket::kVerdictRecoverableFailure);
+    EXPECT_EQ(validation.verdict, Verdict::recoverableFailure);
 }
 
 TEST_F(Judging, EscapesTheNamesOfCertificates) {
@@ -146,7 +147,7 @@ TEST_F(Judging, RefusesASignatureOfAnotherKey) {
     const Validation validation = judge(forged);
     expectRefusal(validation, Step::signature, forged.size() - 72);
     EXPECT_EQ(validation.reason, "the signature does not verify");
-    EXPECT_EQ(validation.verdict, ticket::kVerdictUnspecified);
+    EXPECT_EQ(validation.verdict, Verdict::unspecified);
 }
 
 TEST_F(Judging, RefusesASignedPayloadThatIsNone) {
@@ -203,9 +204,8 @@ TEST_F(Judging, TakesRootsInPem) {
 TEST(TrustedRootsOfATicket, AreRefusedWhenTheyAreNoCertificates) {
     for (const std::string_view text : {"", "certificates", "-----BEGIN CERTIFICATE-----\nAAAA\n"}) {
         const auto result = TrustedRoots::fromCertificates(asBytes(text));
-        const auto* const error = std::get_if<ticket::Error>(&result);
-        ASSERT_NE(error, nullptr) << text;
-        EXPECT_EQ(error->code, ticket::ErrorCode::noCertificates);
+        ASSERT_FALSE(result) << text;
+        EXPECT_EQ(result.error().code, ticket::ErrorCode::noCertificates);
     }
 }
 
@@ -232,14 +232,14 @@ TEST_F(PlatformRoots, AreNotThoseThatTheUserAllows) {
     writeFile(platform / "user-trust/allow/root.pem", chain.root.pem());
     const Validation validation = judgeByPlatform();
     EXPECT_EQ(validation.step, Step::chain);
-    EXPECT_EQ(validation.verdict, ticket::kVerdictProceed);
+    EXPECT_EQ(validation.verdict, Verdict::proceed);
 }
 
 TEST_F(PlatformRoots, AreOverruledByTheUsersDistrust) {
     writeFile(platform / "roots/root.pem", chain.root.pem());
     writeFile(platform / "user-trust/deny/leaf.pem", chain.leaf.pem());
     const Validation validation = judgeByPlatform();
-    EXPECT_EQ(validation.verdict, ticket::kVerdictDeny);
+    EXPECT_EQ(validation.verdict, Verdict::deny);
     EXPECT_EQ(validation.offset, 16U + 4U);
 }
 

@@ -7,8 +7,8 @@ from typing import Any, Union
 
 from ._ffi import ffi
 
-LIBRARY = "libpinwell-ticket.so.0"
-OLDEST = 2  # interface 0.2, with which the functions came
+LIBRARY = "libpinwell-ticket.so.1"
+OLDEST = 1000  # interface 1.0, the first with this name
 
 PathLike = Union[str, bytes, "os.PathLike[str]", "os.PathLike[bytes]"]
 
@@ -20,7 +20,7 @@ def _load() -> Any:
     except AttributeError:
         version = 0
     if version < OLDEST:
-        raise ImportError(f"{LIBRARY} is too old: the interface has to be 0.{OLDEST} or later")
+        raise ImportError(f"{LIBRARY} is too old: the interface has to be 1.0 or later")
     return library
 
 

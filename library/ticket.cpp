@@ -1,16 +1,26 @@
-// Finds a ticket in a disk image and in a flat package, by the steps of the tool.
+// Takes tickets apart with the surveys of the tool, and finds them in disk images and flat packages by the
+// steps of the tool.
+#include "pinwell/ticket.h"
+
 #include <utility>
 
 #include "files/file_reader.h"
-#include "library/conversion.h"
+#include "foundation/bytes.h"
+#include "foundation/error.h"
 #include "src/PWHashedFile/disk_image_signature.h"
 #include "src/PWHashedFile/held_ticket.h"
 #include "src/PWHashedFile/package_trailer_walk.h"
+#include "src/satchel.h"
+#include "src/satchel_internal.h"
+#include "src/ticket_fault.h"
+#include "src/tm_ticket.h"
 
 namespace pinwell::ticket {
-inline namespace v0 {
+inline namespace v1 {
 
-static_assert(kTrailerTerminator == kTerminatorTrailerType && kTrailerTicket == kTicketTrailerType);
+static_assert(kFlagRevoked == kTicketRevoked);
+static_assert(TrailerType{kTerminatorTrailerType} == TrailerType::terminator);
+static_assert(TrailerType{kTicketTrailerType} == TrailerType::ticket);
 
 namespace {
 
@@ -19,6 +29,21 @@ using Opened = foundation::Result<std::unique_ptr<FileReader>>;
 
 /// The parsers' own messages, which name the file, are for the tool's verbose mode.
 constexpr const char* kNoName = "";
+
+Error malformed(const ticket_fault& fault, std::uint64_t base = 0) {
+    return {ErrorCode::malformed, base + fault.offset, 0, fault.rule};
+}
+
+Error unreadable(const foundation::Error& error) {
+    const bool isErrno = error.domain() == foundation::kPOSIXErrorDomain;
+    return {ErrorCode::unreadable, 0, isErrno ? static_cast<int>(error.code()) : 0,
+            error.localizedFailureReason()};
+}
+
+/// The offset of `part` in `whole`, which contains it.
+std::uint64_t offsetIn(ByteView whole, const std::byte* part) {
+    return static_cast<std::uint64_t>(part - whole.data());
+}
 
 Slot slotOf(const BlobRecord& blob, std::uint64_t superblobOffset) {
     return {blob.slotType,
@@ -58,7 +83,7 @@ Result<FlatPackage> flatPackageIn(FileReader& file) {
             // A length that leads out of the file ends the walk with a fault; then this value is not
             // returned.
             const std::uint64_t length = record.length();
-            package.trailers.push_back({record.type(), recordOffset, {recordOffset - length, length}});
+            package.trailers.push_back({TrailerType{record.type()}, recordOffset, {recordOffset - length, length}});
         });
     if (read.fault) return malformed(*read.fault);
     package.fileSize = read.fileSize;
@@ -77,6 +102,43 @@ auto readIn(const Opened& file, Read read) -> decltype(read(**file)) {
 
 }  // namespace
 
+std::uint32_t version() noexcept {
+    return PINWELL_TICKET_VERSION;
+}
+
+Result<Container> decodeContainer(ByteView ticket) {
+    const satchel_survey frame = satchel_survey_container(ticket);
+    if (frame.fault) return malformed(*frame.fault);
+
+    const ByteView block(frame.view.certificates, frame.view.certificates_length);
+    const satchel_certificate_block certificates = satchel_survey_certificates(block);
+    if (certificates.fault) return malformed(*certificates.fault, offsetIn(ticket, block.data()));
+
+    Container container;
+    container.version = frame.header->version;
+    container.reserved = frame.header->reserved;
+    container.signedBytes = ByteView(frame.view.signed_data, frame.view.signed_data_length);
+    const auto found = std::span(certificates.elements).first(certificates.count);
+    container.certificates.assign(found.begin(), found.end());
+    container.payload = ByteView(frame.view.payload, frame.view.payload_length);
+    container.signature = ByteView(frame.view.signature, frame.view.signature_length);
+    return container;
+}
+
+Result<Payload> decodePayload(ByteView payload) {
+    const tm_ticket_survey survey = tm_ticket_survey_payload(payload);
+    if (survey.fault) return malformed(*survey.fault);
+    return Payload{survey.header->version, survey.header->hash_length,    survey.header->count,
+                   survey.header->flags,   survey.header->signature_time, payload};
+}
+
+std::optional<Entry> entryAt(const Payload& payload, std::uint64_t index) {
+    const tm_ticket_survey survey = tm_ticket_survey_payload(payload.bytes);
+    tm_cdhash cdhash;
+    if (survey.fault || tm_ticket_survey_copy_cdhash(survey, index, &cdhash) != 0) return std::nullopt;
+    return Entry{cdhash.algorithm, foundation::toData(ByteView(cdhash.hash).first(cdhash.length))};
+}
+
 Result<DiskImage> readDiskImage(const std::string& path) {
     return readIn(files::openReader(path), diskImageIn);
 }
@@ -93,5 +155,5 @@ Result<FlatPackage> readFlatPackage(int descriptor) {
     return readIn(files::readerOf(descriptor, kNoName), flatPackageIn);
 }
 
-}  // namespace v0
+}  // namespace v1
 }  // namespace pinwell::ticket
