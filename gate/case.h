@@ -11,8 +11,7 @@
 #include <string>
 
 #include "foundation/bytes.h"
-#include "gate/options.h"
-#include "gate/result.h"
+#include "gate/run.h"
 #include "gate/ticket_directory.h"
 #include "retrieval/ticket_fetch.h"
 #include "src/PWHashedFile/PWHashedFile.h"

@@ -1,4 +1,4 @@
-// // pinwell-gate: judges whether to accept received software.
+// pinwell-gate: judges whether to accept received software.
 #include <sysexits.h>
 
 #include <CLI/CLI.hpp>
@@ -7,20 +7,19 @@
 #include <exception>
 #include <filesystem>
 #include <map>
-#include <memory>
 #include <optional>
 #include <string>
 #include <vector>
 
-#include "codesign/code_error.h"
 #include "companion/command_line.h"
-#include "foundation/format.h"
+#include "foundation/error.h"
 #include "foundation/process.h"
 #include "gate/find.h"
 #include "gate/policy.h"
 #include "gate/render.h"
 #include "gate/report_file.h"
 #include "gate/run.h"
+#include "gate/ticket_directory.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"
@@ -44,12 +43,13 @@ struct PolicyArguments {
     std::vector<std::string> identifiers;
     bool requiresSecureTimestamp = false;
 
-    Policy combined() const {
-        Policy policy = file.empty() ? Policy() : readPolicyFile(file);
-        if (!maximumTicketAge.empty()) policy.maximumTicketAge = ageFrom(maximumTicketAge);
-        if (!teams.empty()) policy.teams = teams;
-        if (!identifiers.empty()) policy.identifiers = identifiers;
-        policy.requiresSecureTimestamp = policy.requiresSecureTimestamp || requiresSecureTimestamp;
+    foundation::Result<Policy> combined() const {
+        foundation::Result<Policy> policy = file.empty() ? Policy() : readPolicyFile(file);
+        if (!policy) return policy;
+        if (!maximumTicketAge.empty()) policy->maximumTicketAge = ageFrom(maximumTicketAge);
+        if (!teams.empty()) policy->teams = teams;
+        if (!identifiers.empty()) policy->identifiers = identifiers;
+        policy->requiresSecureTimestamp = policy->requiresSecureTimestamp || requiresSecureTimestamp;
         return policy;
     }
 };
@@ -170,8 +170,8 @@ int openReports(const Options& options, ReportFile& report, ReportFile& attestat
         }
     }
     for (ReportFile* const file : {&report, &attestation}) {
-        if (const auto problem = file->open()) {
-            complain(*problem);
+        if (const auto opened = file->open(); !opened) {
+            complain(opened.error().localizedFailureReason());
             return EX_CANTCREAT;
         }
     }
@@ -191,14 +191,14 @@ bool isArtefact(const ReportFile& file, const std::vector<std::string>& paths) {
 
 int writeReports(const Options& options, const std::vector<Result>& results, ReportFile& report,
                  ReportFile& attestation) {
-    std::optional<std::string> problem = report.write(render(options.format, results));
-    if (!problem && !options.attestation.empty()) {
+    foundation::Result<void> written = report.write(render(options.format, results));
+    if (written && !options.attestation.empty()) {
         const auto now = std::chrono::system_clock::now().time_since_epoch();
         const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(now).count();
-        problem = attestation.write(renderAttestation(results, options, seconds));
+        written = attestation.write(renderAttestation(results, options, seconds));
     }
-    if (!problem) return exitStatusOf(results);
-    complain(*problem);
+    if (written) return exitStatusOf(results);
+    complain(written.error().localizedFailureReason());
     return EX_IOERR;
 }
 
@@ -212,19 +212,19 @@ int gate(const Options& options) {
     if (const int status = openReports(options, report, attestation); status != EX_OK) return status;
     confine(options, platform);
 
-    std::unique_ptr<const TicketDirectory> tickets;
+    std::optional<TicketDirectory> tickets;
     if (options.tickets == Options::Tickets::directory) {
-        try {
-            tickets = std::make_unique<TicketDirectory>(options.ticketDirectory);
-        } catch (const codesign::CodeError& error) {
-            complain(std::string("cannot read the tickets: ") + error.what());
+        foundation::Result<TicketDirectory> opened = TicketDirectory::open(options.ticketDirectory);
+        if (!opened) {
+            complain("cannot read the tickets: " + opened.error().localizedFailureReason());
             return EX_NOINPUT;
         }
+        tickets = *std::move(opened);
     }
     std::vector<Result> problems;
     const std::vector<std::string> paths = expanded(options, platform, problems);
     if (isArtefact(report, paths) || isArtefact(attestation, paths)) return EX_USAGE;
-    std::vector<Result> results = judgeAll(paths, options, tickets.get(), platform);
+    std::vector<Result> results = judgeAll(paths, options, tickets ? &*tickets : nullptr, platform);
     results.insert(results.end(), problems.begin(), problems.end());
     return writeReports(options, results, report, attestation);
 }
@@ -245,12 +245,12 @@ int run(int argc, char** argv) {
         return EX_USAGE;
     }
     if (options.output == "-") options.output.clear();
-    try {
-        options.policy = policy.combined();
-    } catch (const PolicyError& error) {
-        complain(error.what());
+    foundation::Result<Policy> combined = policy.combined();
+    if (!combined) {
+        complain(combined.error().localizedFailureReason());
         return EX_CONFIG;
     }
+    options.policy = *std::move(combined);
     return gate(options);
 }
 

@@ -12,11 +12,11 @@
 
 #include <cstdint>
 #include <optional>
-#include <stdexcept>
 #include <string>
 #include <string_view>
 
-#include "gate/options.h"
+#include "foundation/error.h"
+#include "gate/run.h"
 #include "verify/executable.h"
 #include "verify/judged_ticket.h"
 
@@ -25,12 +25,6 @@ namespace pinwell::gate {
 /// Longest policy file.
 inline constexpr std::size_t kMaximumPolicyFile = std::size_t{1024} * 1024;
 
-/// The fault of a policy file: "FILE:LINE: fault".
-class PolicyError : public std::runtime_error {
-  public:
-    using std::runtime_error::runtime_error;
-};
-
 /// `nullopt` if the text is not an age, or is beyond ten thousand years.
 std::optional<std::int64_t> ageFrom(std::string_view text);
 
@@ -38,8 +32,9 @@ std::optional<std::int64_t> ageFrom(std::string_view text);
 /// product of their lengths.
 bool matchesGlob(std::string_view glob, std::string_view text);
 
-/// Throws PolicyError if the file cannot be read, is not TOML, or has an unknown key or value.
-Policy readPolicyFile(const std::string& path);
+/// Returns an error if the file cannot be read, is not TOML, or has an unknown key or value. Its reason is
+/// "FILE:LINE: fault", or "FILE: fault" if no line has it.
+foundation::Result<Policy> readPolicyFile(const std::string& path);
 
 /// Adds a check for each requirement of the policy. `deciding`: the ticket whose age counts; null without a
 /// genuine ticket. Every slice of the artefact's own code must satisfy the policy; nested code need not.

@@ -5,8 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "gate/options.h"
-#include "gate/result.h"
+#include "gate/run.h"
 
 namespace pinwell::gate {
 

@@ -7,6 +7,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <filesystem>
+#include <optional>
 #include <system_error>
 
 #include "companion/streams.h"
@@ -17,8 +18,9 @@ namespace {
 
 namespace fs = std::filesystem;
 
-std::string reasonOf(int code) {
-    return std::generic_category().message(code);
+foundation::Error cannotWrite(const std::string& name, int code) {
+    const std::string reason = code == 0 ? std::string() : ": " + std::generic_category().message(code);
+    return {foundation::kPOSIXErrorDomain, code, "cannot write to " + name + reason};
 }
 
 /// The status of a descriptor's regular file; `nullopt` for anything else.
@@ -34,13 +36,13 @@ bool isSame(const struct stat& a, const struct stat& b) {
 
 }  // namespace
 
-std::optional<std::string> ReportFile::open() {
-    if (path_.empty()) return std::nullopt;
+foundation::Result<void> ReportFile::open() {
+    if (path_.empty()) return {};
     constexpr mode_t kMode = 0666;
     file_ =
         foundation::FileDescriptor(::open(path_.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOCTTY, kMode));
-    if (file_) return std::nullopt;
-    return "cannot write to " + path_ + ": " + reasonOf(errno);
+    if (!file_) return cannotWrite(path_, errno);
+    return {};
 }
 
 const std::string* ReportFile::amongst(const std::vector<std::string>& paths) const {
@@ -59,18 +61,17 @@ bool ReportFile::isSameAs(const ReportFile& other) const {
     return a && b && isSame(*a, *b);
 }
 
-std::optional<std::string> ReportFile::write(std::string_view document) {
+foundation::Result<void> ReportFile::write(std::string_view document) {
     const int descriptor = path_.empty() ? STDOUT_FILENO : file_.get();
     const std::string name = path_.empty() ? std::string("standard output") : path_;
     if (!path_.empty() && regularFile(descriptor) && ::ftruncate(descriptor, 0) != 0)
-        return "cannot write to " + name + ": " + reasonOf(errno);
+        return cannotWrite(name, errno);
     companion::Output output(descriptor);
     output.write(document);
-    if (output.hasFailed()) return "cannot write to " + name;
+    if (output.hasFailed()) return cannotWrite(name, 0);
     // Some file systems report a failed write only on close.
-    if (!path_.empty() && ::close(file_.release()) != 0)
-        return "cannot write to " + name + ": " + reasonOf(errno);
-    return std::nullopt;
+    if (!path_.empty() && ::close(file_.release()) != 0) return cannotWrite(name, errno);
+    return {};
 }
 
 const std::string* directoryAround(const std::string& path, const std::vector<std::string>& directories) {

@@ -1,25 +1,25 @@
 // The output of a document: a file, or standard output.
 #pragma once
 
-#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
 
+#include "foundation/error.h"
 #include "foundation/file_io.h"
 
 namespace pinwell::gate {
 
-/// Opened before any artefact is read, because a confined process can open no more files. The old contents
-/// stay until the document replaces them. So nothing is lost if the run is interrupted, or if the file turns
-/// out to be an artefact.
+/// Errors name the file: their reason is a line for people. Opened before any artefact is read, because a
+/// confined process can open no more files. The old contents stay until the document replaces them. So
+/// nothing is lost if the run is interrupted, or if the file turns out to be an artefact.
 class ReportFile {
   public:
     /// Empty: standard output.
     explicit ReportFile(std::string path) : path_(std::move(path)) {}
 
-    /// Opens or creates the file. Returns the error, if any.
-    std::optional<std::string> open();
+    /// Opens or creates the file.
+    foundation::Result<void> open();
 
     /// The first of `paths` that is this file, by any name; `nullptr` if none is. Always `nullptr` for
     /// devices and pipes.
@@ -28,9 +28,8 @@ class ReportFile {
     /// Whether both are one file. Always false for devices and pipes.
     bool isSameAs(const ReportFile& other) const;
 
-    /// Replaces the contents by the document. A closed pipe is not an error. Returns the error, if
-    /// any.
-    std::optional<std::string> write(std::string_view document);
+    /// Replaces the contents by the document. A closed pipe is not an error.
+    foundation::Result<void> write(std::string_view document);
 
   private:
     std::string path_;

@@ -1,5 +1,7 @@
 #include "gate/run.h"
 
+#include <sysexits.h>
+
 #include <algorithm>
 #include <chrono>
 #include <memory>
@@ -36,6 +38,44 @@ void askService(std::vector<Case>& cases, const Platform& platform) {
 }
 
 }  // namespace
+
+std::string_view verdictName(Verdict verdict) {
+    switch (verdict) {
+        case Verdict::good:
+            return "good";
+        case Verdict::unreachable:
+            return "unreachable";
+        case Verdict::unreadable:
+            return "unreadable";
+        case Verdict::noTicket:
+            return "noTicket";
+        case Verdict::refused:
+            return "refused";
+        case Verdict::altered:
+            return "altered";
+        case Verdict::revoked:
+            break;
+    }
+    return "revoked";
+}
+
+int exitStatusOf(Verdict verdict) {
+    switch (verdict) {
+        case Verdict::good:
+            return EX_OK;
+        case Verdict::unreachable:
+            return EX_NOHOST;
+        case Verdict::unreadable:
+            return EX_NOINPUT;
+        case Verdict::noTicket:
+        case Verdict::refused:
+        case Verdict::altered:
+            return EX_DATAERR;
+        case Verdict::revoked:
+            break;
+    }
+    return EX_NOPERM;
+}
 
 std::vector<Result> judgeAll(const std::vector<std::string>& paths, const Options& options,
                              const TicketDirectory* tickets, const Platform& platform) {

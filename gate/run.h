@@ -1,14 +1,72 @@
-// A run over many paths: parallel reading, one series of lookups, one verdict for each path.
+// A run over many paths: its options, and the result for each path. Parallel reading, one series of lookups.
 #pragma once
 
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
 #include <vector>
 
-#include "gate/options.h"
-#include "gate/result.h"
-#include "gate/ticket_directory.h"
+#include "foundation/bytes.h"
 #include "src/platform.h"
+#include "verify/check.h"
 
 namespace pinwell::gate {
+
+class TicketDirectory;
+
+/// Requirements on an artefact besides being unchanged since signing.
+struct Policy {
+    std::optional<std::int64_t> maximumTicketAge;  // in seconds
+    std::vector<std::string> teams;                // one of these; empty: any
+    std::vector<std::string> identifiers;          // globs, one must match; empty: any
+    bool requiresSecureTimestamp = false;
+};
+
+enum class Format { text, json, sarif, junit, html };
+
+struct Options {
+    enum class Tickets { online, offline, directory };
+
+    Tickets tickets = Tickets::online;
+    std::string ticketDirectory;
+    bool isShallow = false;
+    bool isRecursive = false;
+    Policy policy;
+    Format format = Format::text;
+    std::string output;       // a file; empty: standard output
+    std::string attestation;  // a file; empty: none
+    std::vector<std::string> paths;
+};
+
+/// In the order of gravity: the highest of several paths decides the exit status.
+enum class Verdict {
+    good,         // 0
+    unreachable,  // 68: no usable response from the service
+    unreadable,   // 66: it cannot be read, is of no supported kind, or has no signature at all
+    noTicket,     // 65: none is stapled
+    refused,      // 65: the ticket or a policy does not accept it
+    altered,      // 65: something has changed since signing
+    revoked,      // 77
+};
+
+/// "good", "unreachable" and so on.
+std::string_view verdictName(Verdict verdict);
+int exitStatusOf(Verdict verdict);
+
+struct Result {
+    std::string path;  // as given
+    std::string kind;  // "bundle", "diskImage", "package", "executable"; empty if none
+    Verdict verdict = Verdict::unreadable;
+    std::string conclusion;  // a sentence
+    verify::Section checks;
+
+    // Of the artefact; empty without a readable signature.
+    std::string recordName;
+    std::uint32_t digestType = 0;
+    foundation::Data codeHash;
+    foundation::Data fileDigest;  // SHA-256 of a file's bytes, if an attestation is wanted
+};
 
 /// One result for each path, in their order. `tickets` is null without --tickets.
 std::vector<Result> judgeAll(const std::vector<std::string>& paths, const Options& options,

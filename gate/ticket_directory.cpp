@@ -8,9 +8,14 @@ namespace pinwell::gate {
 
 using codesign::CodeError;
 
-TicketDirectory::TicketDirectory(const std::string& path)
-    // The slash makes a link followed: the caller chose the directory.
-    : path_(path), directory_(verify::OpenDirectory::atPath(path + "/")) {}
+foundation::Result<TicketDirectory> TicketDirectory::open(const std::string& path) {
+    try {
+        // The slash makes a link followed: the caller chose the directory.
+        return TicketDirectory(path, verify::OpenDirectory::atPath(path + "/"));
+    } catch (const CodeError& error) {
+        return foundation::Error(foundation::kOSStatusErrorDomain, error.status(), error.what());
+    }
+}
 
 TicketDirectory::Found TicketDirectory::find(const std::string& recordName) const {
     std::string name = recordName + ".ticket";

@@ -3,8 +3,10 @@
 
 #include <optional>
 #include <string>
+#include <utility>
 
 #include "foundation/bytes.h"
+#include "foundation/error.h"
 #include "verify/directory.h"
 
 namespace pinwell::gate {
@@ -15,8 +17,7 @@ inline constexpr std::uint64_t kMaximumTicketFile = std::uint64_t{64} * 1024 * 1
 /// Immutable; may be used from any number of threads.
 class TicketDirectory {
   public:
-    /// Throws codesign::CodeError if it cannot be opened.
-    explicit TicketDirectory(const std::string& path);
+    static foundation::Result<TicketDirectory> open(const std::string& path);
 
     struct Found {
         std::string file;                        // its path, whether it exists or not
@@ -26,6 +27,9 @@ class TicketDirectory {
     Found find(const std::string& recordName) const;
 
   private:
+    TicketDirectory(std::string path, verify::DirectoryRef directory)
+        : path_(std::move(path)), directory_(std::move(directory)) {}
+
     std::string path_;
     verify::DirectoryRef directory_;
 };

@@ -11,7 +11,6 @@ namespace pinwell::test {
 namespace {
 
 using gate::Policy;
-using gate::PolicyError;
 using testing::AllOf;
 using testing::ElementsAre;
 using testing::HasSubstr;
@@ -22,17 +21,13 @@ class PolicyFile : public testing::Test {
   protected:
     Policy read(std::string_view text) const {
         writeFile(path, text);
-        return gate::readPolicyFile(path);
+        return *gate::readPolicyFile(path);
     }
 
     /// The complaint about the file; empty if it can be read.
     std::string fault() const {
-        try {
-            static_cast<void>(gate::readPolicyFile(path));
-            return {};
-        } catch (const PolicyError& error) {
-            return error.what();
-        }
+        const auto policy = gate::readPolicyFile(path);
+        return policy ? std::string() : policy.error().localizedFailureReason();
     }
     std::string faultOf(std::string_view text) const {
         writeFile(path, text);

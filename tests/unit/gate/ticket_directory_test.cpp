@@ -36,8 +36,9 @@ class FetchedTickets : public GateTest {
 
     /// Expects this result, with this outcome of the check of the fetched ticket.
     void expect(int exitStatus, std::string_view check, Outcome outcome) const {
-        const TicketDirectory tickets(directory / "tickets");
-        const Result result = judge(image, &tickets);
+        const auto tickets = TicketDirectory::open(directory / "tickets");
+        ASSERT_TRUE(tickets);
+        const Result result = judge(image, &*tickets);
         EXPECT_EQ(gate::exitStatusOf(result.verdict), exitStatus) << result.conclusion;
         std::vector<Outcome> outcomes;
         for (const Check& one : verify::flattened(result.checks))
