@@ -5,7 +5,7 @@
 #include <string>
 #include <tuple>
 
-#include "verify/check_names.h"
+#include "verify/check.h"
 
 namespace pinwell::fuzz {
 namespace {

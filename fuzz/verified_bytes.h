@@ -7,7 +7,7 @@
 #include "codesign/byte_source.h"
 #include "target.h"
 #include "verify/check.h"
-#include "verify/executable.h"
+#include "verify/code.h"
 #include "verify/workers.h"
 
 namespace pinwell::fuzz {

@@ -11,7 +11,7 @@
 #include "foundation/byte_writer.h"
 #include "support/tabled_image_builder.h"
 #include "verified_bytes.h"
-#include "verify/disk_image.h"
+#include "verify/code.h"
 
 namespace pinwell::fuzz {
 namespace {

@@ -8,7 +8,7 @@
 #include "support/archive_builder.h"
 #include "verified_bytes.h"
 #include "verify/archive_table.h"
-#include "verify/package.h"
+#include "verify/code.h"
 
 #include <algorithm>
 

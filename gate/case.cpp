@@ -10,9 +10,9 @@
 #include "foundation/url.h"
 #include "gate/policy.h"
 #include "src/ticket_record.h"
-#include "verify/artefact_kind.h"
-#include "verify/check_names.h"
+#include "verify/check.h"
 #include "verify/page_digest.h"
+#include "verify/verify.h"
 
 namespace pinwell::gate {
 

@@ -15,7 +15,7 @@
 #include "foundation/file_io.h"
 #include "foundation/format.h"
 #include "foundation/toml_keys.h"
-#include "verify/check_names.h"
+#include "verify/check.h"
 
 namespace pinwell::gate {
 

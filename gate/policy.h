@@ -17,7 +17,7 @@
 
 #include "foundation/error.h"
 #include "gate/run.h"
-#include "verify/executable.h"
+#include "verify/code.h"
 #include "verify/judged_ticket.h"
 
 namespace pinwell::gate {

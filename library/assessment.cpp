@@ -12,8 +12,7 @@
 #include "src/PWHashedFile/ticket_place.h"
 #include "src/explain_ticket.h"
 #include "src/record_name.h"
-#include "verify/artefact_kind.h"
-#include "verify/check_names.h"
+#include "verify/check.h"
 #include "verify/judged_ticket.h"
 #include "verify/verify.h"
 

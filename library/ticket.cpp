@@ -83,7 +83,8 @@ Result<FlatPackage> flatPackageIn(FileReader& file) {
             // A length that leads out of the file ends the walk with a fault; then this value is not
             // returned.
             const std::uint64_t length = record.length();
-            package.trailers.push_back({TrailerType{record.type()}, recordOffset, {recordOffset - length, length}});
+            package.trailers.push_back(
+                {TrailerType{record.type()}, recordOffset, {recordOffset - length, length}});
         });
     if (read.fault) return malformed(*read.fault);
     package.fileSize = read.fileSize;

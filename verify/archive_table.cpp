@@ -5,18 +5,27 @@
 #include <utility>
 
 #include "codesign/code_error.h"
+#include "foundation/byte_reader.h"
+#include "foundation/format.h"
 #include "foundation/xml_parser.h"
-#include "xar/digest.h"
+#include "xar/header.h"
+#include "xar/inflater.h"
+#include "xar/table_of_contents.h"
 
 namespace pinwell::verify {
 
+using codesign::ByteSource;
 using codesign::FileRange;
 using codesign::refuse;
+using foundation::format;
 
 namespace {
 
 /// Longest kept text: digests in hexadecimal have up to 128 characters.
 constexpr std::size_t kMaximumText = kMaximumArchivedName;
+
+/// The packed table is read in pieces of this length.
+constexpr std::size_t kTablePieceSize = std::size_t{64} * 1024;
 
 std::string_view trimmed(std::string_view text) {
     constexpr std::string_view kBlank = " \t\r\n";
@@ -88,6 +97,22 @@ struct Described {
         return FileRange{*offset, *length};
     }
 };
+
+/// Checks the fields that the archive reader ignores: no checksum covers the header.
+void requireHeaderForm(ByteView start, const xar::Header& header) {
+    constexpr std::size_t kVersionOffset = 6;
+    constexpr std::uint16_t kVersion = 1;
+    foundation::ByteReader reader(start);
+    reader.seek(kVersionOffset, "version");
+    if (const std::uint16_t version = reader.be16("version"); version != kVersion)
+        refuse(format("the archive's header has the version %u", version));
+    if (header.size > xar::kLongestHeaderRead) refuse("the archive's header is too long");
+    const ByteView name =
+        start.first(std::min<std::size_t>(header.size, start.size())).subspan(xar::kFixedHeaderSize);
+    const auto end = std::find(name.begin(), name.end(), std::byte{0});
+    if (std::any_of(end, name.end(), [](std::byte byte) { return byte != std::byte{0}; }))
+        refuse("the archive's header has bytes after the checksum algorithm's name");
+}
 
 }  // namespace
 
@@ -292,6 +317,44 @@ void ArchiveTableReader::feed(ByteView bytes) {
 
 ArchiveTable ArchiveTableReader::finish() {
     return document_->finish();
+}
+
+Archive readArchive(const ByteSource& source, std::uint64_t end) {
+    const auto start =
+        source.read(0, static_cast<std::size_t>(std::min<std::uint64_t>(xar::kLongestHeaderRead, end)));
+    const std::optional<xar::Header> header = xar::parseHeader(start);
+    if (!header) refuse("the archive's header is damaged");
+    requireHeaderForm(start, *header);
+    if (header->size > end || header->compressedLength > end - header->size ||
+        header->compressedLength > xar::kMaximumTableOfContents)
+        refuse("the table of contents lies outside the archive");
+
+    ArchiveTableReader reader;
+    std::uint64_t length = 0;
+    xar::Inflater inflater(xar::kMaximumTableOfContents, [&](ByteView bytes) {
+        length += bytes.size();
+        reader.feed(bytes);
+        return true;
+    });
+    xar::Digest digest(header->algorithm);
+    Archive archive;
+    archive.heapStart = header->size + header->compressedLength;
+    for (std::uint64_t at = header->size; at < archive.heapStart;) {
+        const Data piece = source.read(
+            at, static_cast<std::size_t>(std::min<std::uint64_t>(kTablePieceSize, archive.heapStart - at)));
+        digest.update(piece);
+        if (!inflater.feed(piece)) refuse("the table of contents cannot be decompressed");
+        at += piece.size();
+    }
+    if (!inflater.complete()) refuse("the table of contents cannot be decompressed");
+    foundation::ByteReader stated(start);
+    stated.seek(16, "uncompressed length");
+    if (stated.be64("uncompressed length") != length)
+        refuse("the header states another length of the table of contents");
+    archive.table = reader.finish();
+    archive.algorithm = header->algorithm;
+    archive.computed = digest.finish();
+    return archive;
 }
 
 }  // namespace pinwell::verify

@@ -1,5 +1,5 @@
-// The table of contents of a package archive, for deep verification: everything that has bytes in the heap,
-// with the digest that the table states for them. (xar/table_of_contents.h reads the rest.)
+// The header and the table of contents of a package archive, for deep verification: everything that has bytes
+// in the heap, with the digest that the table states for them. (xar/table_of_contents.h reads the rest.)
 //
 //   <xar><toc>
 //     <checksum style="sha1"><offset>0</offset><size>20</size></checksum>
@@ -21,8 +21,10 @@
 #include <string>
 #include <vector>
 
+#include "codesign/byte_source.h"
 #include "codesign/executable_image.h"
 #include "verify/page_digest.h"
+#include "xar/digest.h"
 
 namespace pinwell::verify {
 
@@ -86,5 +88,17 @@ class ArchiveTableReader {
 
     std::unique_ptr<Document> document_;
 };
+
+/// An archive's header and table of contents.
+struct Archive {
+    std::uint64_t heapStart = 0;
+    ArchiveTable table;
+    xar::DigestAlgorithm algorithm = xar::DigestAlgorithm::none;
+    Data computed;  // checksum of the table
+};
+
+/// Reads the archive at the start of `source`, which ends at `end`. Throws codesign::CodeError if header or
+/// table is refused.
+Archive readArchive(const codesign::ByteSource& source, std::uint64_t end);
 
 }  // namespace pinwell::verify

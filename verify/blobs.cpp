@@ -5,7 +5,7 @@
 #include "codesign/superblob.h"
 #include "foundation/format.h"
 #include "src/PWHashedFile/blob_set.h"
-#include "verify/check_names.h"
+#include "verify/check.h"
 #include "verify/signature_parts.h"
 
 namespace pinwell::verify {

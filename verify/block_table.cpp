@@ -13,7 +13,7 @@
 #include "foundation/format.h"
 #include "foundation/property_list.h"
 #include "foundation/value.h"
-#include "verify/check_names.h"
+#include "verify/check.h"
 #include "verify/page_digest.h"
 #include "xar/inflater.h"
 
@@ -36,7 +36,6 @@ constexpr std::uint32_t kIgnored = 2;
 constexpr std::uint32_t kZlib = 0x80000005;
 constexpr std::uint32_t kComment = 0x7FFFFFFE;
 constexpr std::uint32_t kEnd = 0xFFFFFFFF;
-constexpr std::size_t kPieceSize = std::size_t{64} * 1024;
 
 /// CRC-32 of concatenated parts.
 struct Checksum {
@@ -76,14 +75,10 @@ Checksum checksumOfZeros(std::uint64_t length) {
 
 Checksum checksumOf(const ByteSource& source, const FileRange& range) {
     Checksum checksum;
-    for (std::uint64_t done = 0; done < range.length;) {
-        const auto length =
-            static_cast<std::size_t>(std::min<std::uint64_t>(kBufferSize, range.length - done));
-        const std::span<std::byte> buffer = threadBuffer().first(length);
-        source.read(range.offset + done, buffer);
-        checksum.append(buffer);
-        done += length;
-    }
+    readPieces(source, range, [&](ByteView piece) {
+        checksum.append(piece);
+        return true;
+    });
     return checksum;
 }
 
@@ -215,14 +210,7 @@ void unpack(const ByteSource& source, Block& block) {
             block.found.append(bytes);
             return true;
         });
-        for (std::uint64_t done = 0; block.isSound && done < block.range.length;) {
-            const auto length =
-                static_cast<std::size_t>(std::min<std::uint64_t>(kPieceSize, block.range.length - done));
-            const std::span<std::byte> buffer = threadBuffer().first(length);
-            source.read(block.range.offset + done, buffer);
-            block.isSound = inflater.feed(buffer);
-            done += length;
-        }
+        block.isSound = readPieces(source, block.range, [&](ByteView piece) { return inflater.feed(piece); });
         block.isSound = block.isSound && inflater.complete();
     }
     block.isSound = block.isSound && block.found.length == block.unpackedLength();

@@ -1,5 +1,4 @@
-#include "verify/bundle_walk.h"
-
+// The walk over the files of one bundle.
 #include <algorithm>
 #include <array>
 #include <utility>
@@ -9,8 +8,6 @@
 #include "foundation/byte_reader.h"
 #include "foundation/format.h"
 #include "verify/bundle.h"
-#include "verify/check_names.h"
-#include "verify/link_target.h"
 #include "verify/requirement.h"
 
 namespace pinwell::verify {

@@ -1,4 +1,4 @@
-#include "verify/disk_image.h"
+#include "verify/code.h"
 
 #include <algorithm>
 
@@ -9,7 +9,7 @@
 #include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "verify/block_table.h"
-#include "verify/check_names.h"
+#include "verify/check.h"
 #include "verify/page_hashes.h"
 
 namespace pinwell::verify {

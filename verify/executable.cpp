@@ -1,4 +1,4 @@
-#include "verify/executable.h"
+#include "verify/code.h"
 
 #include <algorithm>
 #include <utility>
@@ -10,7 +10,7 @@
 #include "foundation/byte_reader.h"
 #include "foundation/bytes.h"
 #include "foundation/format.h"
-#include "verify/check_names.h"
+#include "verify/check.h"
 #include "verify/image_layout.h"
 #include "verify/page_digest.h"
 #include "verify/page_hashes.h"
@@ -55,11 +55,11 @@ class ImageCheck {
         std::vector<std::string> unsignedSlices;
         for (const ImageSlice& slice : slices) {
             const std::string at = slices.size() == 1 ? place_ : place_ + ", " + sliceName(slice.cpuType);
-            std::optional<CodeIdentity> identity;
-            if (!checkSlice(slice, at, identity)) unsignedSlices.push_back(at);
-            if (!identity) continue;
+            CheckedSlice checked = checkSlice(slice, at);
+            if (!checked.isSigned) unsignedSlices.push_back(at);
+            if (!checked.identity) continue;
             const auto where = &slice == preferred ? code_.identities.begin() : code_.identities.end();
-            code_.identities.insert(where, *std::move(identity));
+            code_.identities.insert(where, *std::move(checked.identity));
         }
         code_.isSigned = unsignedSlices.size() < slices.size();
         for (const std::string& at : unsignedSlices) section_.fail(kSignature, at, "a signature", "none");
@@ -67,26 +67,30 @@ class ImageCheck {
     }
 
   private:
-    /// Returns false if the slice is not signed.
-    bool checkSlice(const ImageSlice& slice, const std::string& at, std::optional<CodeIdentity>& identity) {
+    struct CheckedSlice {
+        bool isSigned = false;
+        std::optional<CodeIdentity> identity;  // `nullopt` for a damaged signature
+    };
+
+    CheckedSlice checkSlice(const ImageSlice& slice, const std::string& at) {
         const std::optional<FileRange> area = codesign::findImageSignature(source_, slice);
-        if (!area) return false;
+        if (!area) return {};
         try {
             const codesign::SharedBytes superblob =
                 codesign::readSuperBlob(source_, area->offset, area->length);
             const std::optional<SignatureParts> parts = SignatureParts::fromSuperBlob(superblob);
-            if (!parts) return false;
+            if (!parts) return {};
             section_.pass(kSignature, at, "a well-formed signature");
             checkBlobs(superblob, SignatureHost::executable, at, section_);
             notePadding({area->offset + superblob.size(), area->length - superblob.size()}, at);
             checkContents(slice, *area, *parts, at);
-            identity = identityOf(*parts, at);
+            return {true, identityOf(*parts, at)};
         } catch (const CodeError& error) {
             reportBroken(at, error);
         } catch (const foundation::ShortRead& error) {
             section_.fail(kSignature, at, "a well-formed signature", error.what());
         }
-        return true;
+        return {true, std::nullopt};
     }
 
     /// Signers reserve space for a signature and leave old bytes in it.

@@ -7,7 +7,7 @@
 #include "foundation/byte_reader.h"
 #include "foundation/bytes.h"
 #include "foundation/format.h"
-#include "verify/check_names.h"
+#include "verify/check.h"
 #include "verify/page_digest.h"
 
 namespace pinwell::verify {
@@ -95,11 +95,13 @@ struct ListedSlice {
     std::uint32_t spare = 0;
 };
 
+constexpr std::size_t lengthOfList(std::size_t count, bool is64) {
+    return count * (is64 ? 32 : 20);
+}
+
 // readSlices() has checked that the list exists.
-std::vector<ListedSlice> readList(const ByteSource& source, std::size_t count, bool is64, std::size_t& end) {
-    const std::size_t entrySize = is64 ? 32 : 20;
-    end = kUniversalHeaderSize + count * entrySize;
-    const Data bytes = source.read(kUniversalHeaderSize, count * entrySize);
+std::vector<ListedSlice> readList(const ByteSource& source, std::size_t count, bool is64) {
+    const Data bytes = source.read(kUniversalHeaderSize, lengthOfList(count, is64));
     ByteReader reader(bytes);
     std::vector<ListedSlice> list(count);
     for (ListedSlice& slice : list) {
@@ -194,11 +196,11 @@ void checkUniversalHeader(const ByteSource& source, const std::vector<ImageSlice
     if (magic != kUniversalMagic32 && magic != kUniversalMagic64) return;
 
     FailureList failures(section, kImageStructure);
-    std::size_t end = 0;
-    std::vector<ListedSlice> list = readList(source, slices.size(), magic == kUniversalMagic64, end);
+    const bool is64 = magic == kUniversalMagic64;
+    std::vector<ListedSlice> list = readList(source, slices.size(), is64);
     std::sort(list.begin(), list.end(),
               [](const ListedSlice& a, const ListedSlice& b) { return a.range.offset < b.range.offset; });
-    std::uint64_t covered = end;
+    std::uint64_t covered = kUniversalHeaderSize + lengthOfList(slices.size(), is64);
     for (const ListedSlice& listed : list) {
         checkListedSlice(source, listed, place, failures);
         if (!isZero(source, {covered, listed.range.offset - covered}))

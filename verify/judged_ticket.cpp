@@ -6,7 +6,7 @@
 #include "src/explain_ticket.h"
 #include "src/satchel.h"
 #include "src/tm_ticket.h"
-#include "verify/check_names.h"
+#include "verify/check.h"
 
 namespace pinwell::verify {
 

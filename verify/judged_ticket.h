@@ -11,7 +11,7 @@
 #include "src/PWHashedFile/ticket_place.h"
 #include "trust/trust.h"
 #include "verify/check.h"
-#include "verify/executable.h"
+#include "verify/code.h"
 
 namespace pinwell::verify {
 

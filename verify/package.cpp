@@ -1,4 +1,4 @@
-#include "verify/package.h"
+#include "verify/code.h"
 
 #include <algorithm>
 #include <mutex>
@@ -11,13 +11,11 @@
 #include "foundation/byte_reader.h"
 #include "foundation/bytes.h"
 #include "foundation/format.h"
+#include "src/PWHashedFile/package_trailer_walk.h"
 #include "verify/archive_table.h"
-#include "verify/check_names.h"
-#include "verify/package_trailers.h"
+#include "verify/check.h"
 #include "verify/signature_parts.h"
 #include "xar/header.h"
-#include "xar/inflater.h"
-#include "xar/table_of_contents.h"
 
 namespace pinwell::verify {
 
@@ -29,73 +27,10 @@ using foundation::format;
 
 namespace {
 
-constexpr std::size_t kTablePieceSize = std::size_t{64} * 1024;
 constexpr std::string_view kCmsStyle = "CMS";
 
 /// Longest signature that is held whole; a real one takes some 10 KiB.
 constexpr std::uint64_t kMaximumSignature = std::uint64_t{16} * 1024 * 1024;
-
-struct Archive {
-    std::uint64_t heapStart = 0;
-    ArchiveTable table;
-    xar::DigestAlgorithm algorithm = xar::DigestAlgorithm::none;
-    Data computed;  // checksum of the table
-    Data stored;    // the signed one in the heap
-};
-
-/// Checks the fields that the archive reader ignores: no checksum covers the header.
-void requireHeaderForm(ByteView start, const xar::Header& header) {
-    constexpr std::size_t kVersionOffset = 6;
-    constexpr std::uint16_t kVersion = 1;
-    foundation::ByteReader reader(start);
-    reader.seek(kVersionOffset, "version");
-    if (const std::uint16_t version = reader.be16("version"); version != kVersion)
-        refuse(format("the archive's header has the version %u", version));
-    if (header.size > xar::kLongestHeaderRead) refuse("the archive's header is too long");
-    const ByteView name =
-        start.first(std::min<std::size_t>(header.size, start.size())).subspan(xar::kFixedHeaderSize);
-    const auto end = std::find(name.begin(), name.end(), std::byte{0});
-    if (std::any_of(end, name.end(), [](std::byte byte) { return byte != std::byte{0}; }))
-        refuse("the archive's header has bytes after the checksum algorithm's name");
-}
-
-Archive readArchive(const ByteSource& source, std::uint64_t end) {
-    const auto start =
-        source.read(0, static_cast<std::size_t>(std::min<std::uint64_t>(xar::kLongestHeaderRead, end)));
-    const std::optional<xar::Header> header = xar::parseHeader(start);
-    if (!header) refuse("the archive's header is damaged");
-    requireHeaderForm(start, *header);
-    if (header->size > end || header->compressedLength > end - header->size ||
-        header->compressedLength > xar::kMaximumTableOfContents)
-        refuse("the table of contents lies outside the archive");
-
-    ArchiveTableReader reader;
-    std::uint64_t length = 0;
-    xar::Inflater inflater(xar::kMaximumTableOfContents, [&](ByteView bytes) {
-        length += bytes.size();
-        reader.feed(bytes);
-        return true;
-    });
-    xar::Digest digest(header->algorithm);
-    Archive archive;
-    archive.heapStart = header->size + header->compressedLength;
-    for (std::uint64_t at = header->size; at < archive.heapStart;) {
-        const Data piece = source.read(
-            at, static_cast<std::size_t>(std::min<std::uint64_t>(kTablePieceSize, archive.heapStart - at)));
-        digest.update(piece);
-        if (!inflater.feed(piece)) refuse("the table of contents cannot be decompressed");
-        at += piece.size();
-    }
-    if (!inflater.complete()) refuse("the table of contents cannot be decompressed");
-    foundation::ByteReader stated(start);
-    stated.seek(16, "uncompressed length");
-    if (stated.be64("uncompressed length") != length)
-        refuse("the header states another length of the table of contents");
-    archive.table = reader.finish();
-    archive.algorithm = header->algorithm;
-    archive.computed = digest.finish();
-    return archive;
-}
 
 /// A range of the heap as a range of the file; `nullopt` if it is outside.
 std::optional<FileRange> inFile(const Archive& archive, const FileRange& range, std::uint64_t end) {
@@ -103,6 +38,91 @@ std::optional<FileRange> inFile(const Archive& archive, const FileRange& range, 
     if (range.offset > heap || range.length > heap - range.offset) return std::nullopt;
     return FileRange{archive.heapStart + range.offset, range.length};
 }
+
+/// The first bytes of a source, as a file for the walk along the trailers.
+class StartOfSource final : public files::FileReader {
+  public:
+    StartOfSource(const ByteSource& source, std::uint64_t end) : source_(source), end_(end) {}
+
+    std::uint64_t seekToEnd() override { return position_ = end_; }
+    std::uint64_t seek(std::uint64_t position) override { return position_ = position; }
+    std::uint64_t position() override { return position_; }
+    Data read(std::uint64_t length) override {
+        const std::uint64_t rest = end_ - std::min(position_, end_);
+        const auto count = static_cast<std::size_t>(std::min(length, rest));
+        try {
+            Data bytes = source_.read(position_, count);
+            position_ += count;
+            return bytes;
+        } catch (const CodeError& error) {
+            throw files::FileHandleError(error.what());
+        }
+    }
+
+  private:
+    const ByteSource& source_;
+    const std::uint64_t end_;
+    std::uint64_t position_ = 0;
+};
+
+/// Checks the bytes after the archive (src/PWHashedFile/package_trailer.h): none, or a terminator and one
+/// ticket.
+///
+/// The tool skips trailers of other types and keeps them. Here they are faults, because nothing covers them.
+/// A second ticket, a chain without its terminator, and records with non-zero unused bytes are faults too.
+class TrailerCheck {
+  public:
+    TrailerCheck(const ByteSource& source, Section& section)
+        : source_(source), failures_(section, kTrailers), end_(source.size()) {}
+
+    /// The end of the archive, where the trailers begin.
+    std::uint64_t run() {
+        while (walkOnce()) {
+        }
+        if (end_ != source_.size() && !hasTerminator_)
+            fail(end_, "a terminator between archive and trailers", "none");
+        return end_;
+    }
+
+  private:
+    /// The tool's walk stops at the last ticket. Returns whether there may be more.
+    bool walkOnce() {
+        const std::uint64_t before = end_;
+        StartOfSource reader(source_, before);
+        const package_trailers walked = walkPackageTrailers(
+            reader, {},
+            [&](std::uint64_t recordOffset, const trailer_header& record) { visit(recordOffset, record); });
+        hasTerminator_ = walked.hasTerminator;
+        if (walked.fault) fail(walked.fault->offset, "a chain of trailers", walked.fault->rule);
+        return !walked.fault && !hasTerminator_ && end_ != before;
+    }
+
+    void visit(std::uint64_t recordOffset, const trailer_header& record) {
+        constexpr std::size_t kUpperHalf = 12;
+        const ByteView unused = ByteView(record.bytes).subspan(kUpperHalf);
+        end_ = recordOffset - std::min<std::uint64_t>(record.length(), recordOffset);
+        if (std::any_of(unused.begin(), unused.end(), [](std::byte byte) { return byte != std::byte{0}; }))
+            fail(recordOffset + kUpperHalf, "zeros after the length", "other bytes");
+        if (record.type() == kTerminatorTrailerType) {
+            if (record.length() != 0) fail(recordOffset, "a terminator without data", "one with data");
+        } else if (record.type() != kTicketTrailerType) {
+            fail(end_, "a ticket", format("a trailer of type %u, which nothing covers", record.type()));
+        } else if (++tickets_ > 1) {
+            fail(end_, "one ticket", "an earlier one");
+        }
+    }
+
+    void fail(std::uint64_t offset, const char* expected, std::string found) {
+        failures_.add(Outcome::failed, format("trailer (from byte %llu on)", offset), expected,
+                      std::move(found));
+    }
+
+    const ByteSource& source_;
+    FailureList failures_;
+    std::uint64_t end_;
+    std::size_t tickets_ = 0;
+    bool hasTerminator_ = false;
+};
 
 /// Whether the header looks like an archive's, possibly a damaged one.
 bool beginsAsArchive(const ByteSource& source) {
@@ -121,7 +141,7 @@ class PackageCheck {
         : source_(source), workers_(workers), section_(section) {}
 
     VerifiedCode run() {
-        end_ = endOfArchive(source_, section_);
+        end_ = TrailerCheck(source_, section_).run();
         archive_ = readArchive(source_, end_);
         section_.pass(kArchive, "archive",
                       format("a table of contents with %zu files", archive_.table.files.size()));
@@ -145,9 +165,9 @@ class PackageCheck {
             section_.fail(kTableChecksum, kPlace, "a checksum of the header's kind", "none");
             return;
         }
-        archive_.stored = source_.read(range->offset, static_cast<std::size_t>(range->length));
-        const std::string stored = foundation::toHex(archive_.stored);
-        if (archive_.stored == archive_.computed) {
+        stored_ = source_.read(range->offset, static_cast<std::size_t>(range->length));
+        const std::string stored = foundation::toHex(stored_);
+        if (stored_ == archive_.computed) {
             section_.pass(kTableChecksum, kPlace, stored);
         } else {
             section_.fail(kTableChecksum, kPlace, stored, foundation::toHex(archive_.computed));
@@ -172,8 +192,8 @@ class PackageCheck {
             const Data bytes = source_.read(range->offset, static_cast<std::size_t>(range->length));
             const ByteView message = withoutPadding(bytes);
             try {
-                if (archive_.stored.empty()) refuse("there is no checksum that it could be over");
-                const SignerMessage signer = requireSignerMessage(message, archive_.stored);
+                if (stored_.empty()) refuse("there is no checksum that it could be over");
+                const SignerMessage signer = requireSignerMessage(message, stored_);
                 section_.pass(kArchiveSignature, place, kWanted);
                 noteCertificates(signer, place, section_);
                 addIdentity(signer, code);
@@ -187,7 +207,7 @@ class PackageCheck {
         if (!code.identities.empty()) return;
         CodeIdentity identity;
         identity.place = "package";
-        identity.codeHashes = {archive_.stored};
+        identity.codeHashes = {stored_};
         identity.hasSecureTimestamp = signer.hasTimestamp;
         code.identities.push_back(std::move(identity));
     }
@@ -238,11 +258,10 @@ class PackageCheck {
         std::vector<Fault> faults;
         std::mutex mutex;
         workers_.forEach(all.size(), [&](std::size_t i) {
-            Outcome outcome = Outcome::failed;
-            std::string found = faultOf(all[i], outcome);
-            if (found.empty()) return;
+            std::optional<Fault> fault = faultOf(all[i]);
+            if (!fault) return;
             const std::lock_guard lock(mutex);
-            faults.push_back({&all[i], outcome, std::move(found)});
+            faults.push_back(*std::move(fault));
         });
         std::sort(faults.begin(), faults.end(),
                   [](const Fault& a, const Fault& b) { return a.data < b.data; });
@@ -272,19 +291,19 @@ class PackageCheck {
         }
     }
 
-    /// Empty if the bytes match the table.
-    std::string faultOf(const ArchivedData& data, Outcome& outcome) const {
-        if (!data.problem.empty()) return data.problem;
+    /// `nullopt` if the bytes match the table.
+    std::optional<Fault> faultOf(const ArchivedData& data) const {
+        if (!data.problem.empty()) return Fault{&data, Outcome::failed, data.problem};
         const auto range = inFile(archive_, data.range, end_);
-        if (!range) return "it lies outside the archive";
+        if (!range) return Fault{&data, Outcome::failed, "it lies outside the archive"};
         try {
             const ByteView found = digestOf(*data.algorithm, source_, *range);
             const bool isSame =
                 std::equal(found.begin(), found.end(), data.checksum.begin(), data.checksum.end());
-            return isSame ? std::string() : foundation::toHex(found);
+            if (isSame) return std::nullopt;
+            return Fault{&data, Outcome::failed, foundation::toHex(found)};
         } catch (const CodeError& error) {
-            outcome = Outcome::unreadable;
-            return error.what();
+            return Fault{&data, Outcome::unreadable, error.what()};
         }
     }
 
@@ -348,6 +367,7 @@ class PackageCheck {
     Section& section_;
     std::uint64_t end_ = 0;
     Archive archive_;
+    Data stored_;  // the signed checksum in the heap
 };
 
 }  // namespace

@@ -10,31 +10,33 @@ std::span<std::byte> threadBuffer() {
     return {buffer.get(), kBufferSize};
 }
 
-ByteView digestOf(Algorithm algorithm, const codesign::ByteSource& source, const codesign::FileRange& range) {
-    crypto::Hasher& digest = crypto::threadHasher(algorithm);
-    digest.begin();
+bool readPieces(const codesign::ByteSource& source, const codesign::FileRange& range,
+                const std::function<bool(ByteView)>& take) {
     for (std::uint64_t done = 0; done < range.length;) {
         const auto length =
             static_cast<std::size_t>(std::min<std::uint64_t>(kBufferSize, range.length - done));
         const std::span<std::byte> buffer = threadBuffer().first(length);
         source.read(range.offset + done, buffer);
-        digest.update(buffer);
+        if (!take(buffer)) return false;
         done += length;
     }
+    return true;
+}
+
+ByteView digestOf(Algorithm algorithm, const codesign::ByteSource& source, const codesign::FileRange& range) {
+    crypto::Hasher& digest = crypto::threadHasher(algorithm);
+    digest.begin();
+    readPieces(source, range, [&](ByteView piece) {
+        digest.update(piece);
+        return true;
+    });
     return digest.finish();
 }
 
 bool isZero(const codesign::ByteSource& source, const codesign::FileRange& range) {
-    for (std::uint64_t done = 0; done < range.length;) {
-        const auto length =
-            static_cast<std::size_t>(std::min<std::uint64_t>(kBufferSize, range.length - done));
-        const std::span<std::byte> buffer = threadBuffer().first(length);
-        source.read(range.offset + done, buffer);
-        if (std::any_of(buffer.begin(), buffer.end(), [](std::byte byte) { return byte != std::byte{0}; }))
-            return false;
-        done += length;
-    }
-    return true;
+    return readPieces(source, range, [](ByteView piece) {
+        return std::all_of(piece.begin(), piece.end(), [](std::byte byte) { return byte == std::byte{0}; });
+    });
 }
 
 }  // namespace pinwell::verify

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <cstddef>
+#include <functional>
 #include <span>
 
 #include "codesign/byte_source.h"
@@ -21,6 +22,11 @@ using codesign::algorithmOf;
 /// The thread's own buffer of `kBufferSize` bytes. A function that uses it must not call another that does.
 inline constexpr std::size_t kBufferSize = std::size_t{512} * 1024;
 std::span<std::byte> threadBuffer();
+
+/// Reads a range of a source piece by piece into the thread's buffer, until `take` returns false. Returns
+/// false then. Throws codesign::CodeError.
+bool readPieces(const codesign::ByteSource& source, const codesign::FileRange& range,
+                const std::function<bool(ByteView)>& take);
 
 /// The digest of a range of a source, with the thread's hasher and buffer; valid until that hasher is used
 /// again. Throws codesign::CodeError.

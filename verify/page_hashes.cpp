@@ -7,7 +7,7 @@
 #include "codesign/code_error.h"
 #include "foundation/bytes.h"
 #include "foundation/format.h"
-#include "verify/check_names.h"
+#include "verify/check.h"
 #include "verify/page_digest.h"
 
 namespace pinwell::verify {

@@ -13,7 +13,7 @@
 
 #include <string_view>
 
-#include "verify/executable.h"
+#include "verify/code.h"
 
 namespace pinwell::verify {
 

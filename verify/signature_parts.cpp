@@ -8,7 +8,7 @@
 #include "codesign/superblob.h"
 #include "foundation/byte_reader.h"
 #include "foundation/format.h"
-#include "verify/check_names.h"
+#include "verify/check.h"
 
 namespace pinwell::verify {
 

@@ -1,16 +1,47 @@
 #include "verify/verify.h"
 
+#include <optional>
+#include <utility>
+
+#include "codesign/byte_source.h"
 #include "codesign/code_error.h"
+#include "codesign/executable_image.h"
 #include "foundation/byte_reader.h"
+#include "foundation/error.h"
 #include "foundation/places.h"
-#include "verify/bundle.h"
-#include "verify/check_names.h"
-#include "verify/disk_image.h"
-#include "verify/package.h"
+#include "src/PWHashedFile/PWHashedBundle.h"
+#include "src/PWHashedFile/PWHashedDiskImage.h"
+#include "src/PWHashedFile/PWHashedFlatPackage.h"
 
 namespace pinwell::verify {
 
 namespace {
+
+std::string reasonOf(const foundation::Error& error) {
+    const std::string& reason = error.localizedFailureReason();
+    return reason.empty() ? error.localizedDescription() : reason;
+}
+
+bool isExecutableImage(const std::string& path) {
+    try {
+        return codesign::isExecutableImage(codesign::FileSource(foundation::Places(), path));
+    } catch (const codesign::CodeError&) {
+        return false;
+    }
+}
+
+/// The tool's kind; `nullopt` for a path that it refuses, or accepts only as a fallback.
+std::optional<Kind> kindOf(const PWHashedFile& file, bool isFile, const std::string& path) {
+    if (dynamic_cast<const PWHashedDiskImage*>(&file) != nullptr && isFile) return Kind::diskImage;
+    if (dynamic_cast<const PWHashedFlatPackage*>(&file) != nullptr && isFile) return Kind::package;
+    if (dynamic_cast<const PWHashedBundle*>(&file) == nullptr) return std::nullopt;
+    if (!isFile) return Kind::bundle;
+    return isExecutableImage(path) ? std::optional(Kind::executable) : std::nullopt;
+}
+
+OpenedArtefact refused(std::string problem) {
+    return {nullptr, Kind::bundle, std::move(problem)};
+}
 
 VerifiedCode verified(const Subject& subject, Workers& workers, Section& root) {
     switch (subject.kind) {
@@ -28,6 +59,37 @@ VerifiedCode verified(const Subject& subject, Workers& workers, Section& root) {
 }
 
 }  // namespace
+
+std::string_view nameOf(Kind kind) {
+    switch (kind) {
+        case Kind::bundle:
+            return "bundle";
+        case Kind::executable:
+            return "executable";
+        case Kind::diskImage:
+            return "diskImage";
+        case Kind::package:
+            break;
+    }
+    return "package";
+}
+
+OpenedArtefact openArtefact(const foundation::URL& url, const Platform& platform) {
+    const auto properties = platform.files.resourceProperties(url);
+    if (!properties) return refused("The path cannot be read: " + reasonOf(properties.error()) + ".");
+    const auto regular = platform.files.isRegularFile(url);
+    const bool isFile = regular && *regular;
+    if (isFile) {
+        if (const auto opened = platform.files.openForReading(url); !opened)
+            return refused("The file cannot be read: " + reasonOf(opened.error()) + ".");
+    }
+    std::shared_ptr<PWHashedFile> file = PWHashedFile::initWithFileURL(url, platform);
+    const auto kind = file ? kindOf(*file, isFile, url.path()) : std::nullopt;
+    if (!kind && properties->isSymbolicLink)
+        return refused("This is a symbolic link; what it leads to must be named.");
+    if (!kind) return refused("This is of no kind that carries a ticket.");
+    return {std::move(file), *kind, {}};
+}
 
 Report verifyArtefact(const Subject& subject, Workers& workers) {
     Report report;

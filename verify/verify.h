@@ -11,15 +11,36 @@
 // may be verified at once, with the same workers.
 #pragma once
 
+#include <memory>
 #include <string>
+#include <string_view>
 
+#include "foundation/url.h"
+#include "src/PWHashedFile/PWHashedFile.h"
+#include "src/platform.h"
 #include "verify/check.h"
-#include "verify/executable.h"
+#include "verify/code.h"
 #include "verify/workers.h"
 
 namespace pinwell::verify {
 
 enum class Kind { bundle, executable, diskImage, package };
+
+/// "bundle", "executable", "diskImage", "package".
+std::string_view nameOf(Kind kind);
+
+/// An opened artefact, or the reason why it was not opened. `file` is null if the path cannot be read or is
+/// of a kind without tickets: the sentence in `problem` says which.
+struct OpenedArtefact {
+    std::shared_ptr<PWHashedFile> file;
+    Kind kind = Kind::bundle;
+    std::string problem;
+};
+
+/// Opens the artefact at `url` like the tool, after checking that it can be read. It has no kind if it is a
+/// file of a directory's kind, or an executable file that is not an executable image. The tool's message
+/// functions must be silent.
+OpenedArtefact openArtefact(const foundation::URL& url, const Platform& platform);
 
 struct Subject {
     Kind kind = Kind::bundle;

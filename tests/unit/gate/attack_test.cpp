@@ -10,7 +10,7 @@
 #include "lumora-local/sample_bundle.h"
 #include "support/archive_builder.h"
 #include "support/executable_image_builder.h"
-#include "verify/package.h"
+#include "verify/code.h"
 
 namespace pinwell::test {
 namespace {

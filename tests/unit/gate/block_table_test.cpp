@@ -6,7 +6,7 @@
 #include "codesign/byte_source.h"
 #include "support/archive_builder.h"
 #include "support/tabled_image_builder.h"
-#include "verify/check_names.h"
+#include "verify/check.h"
 
 namespace pinwell::test {
 namespace {

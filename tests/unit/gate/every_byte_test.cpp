@@ -14,9 +14,7 @@
 #include "support/code_directory_builder.h"
 #include "support/executable_image_builder.h"
 #include "support/signed_image.h"
-#include "verify/disk_image.h"
-#include "verify/executable.h"
-#include "verify/package.h"
+#include "verify/code.h"
 
 namespace pinwell::test {
 namespace {

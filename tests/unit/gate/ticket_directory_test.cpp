@@ -7,7 +7,7 @@
 
 #include "gate_fixture.h"
 #include "lumora-local/sample_disk_image.h"
-#include "verify/check_names.h"
+#include "verify/check.h"
 
 namespace pinwell::test {
 namespace {

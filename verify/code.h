@@ -1,11 +1,14 @@
-// Deep verification of an executable image: every slice, every code directory, every page.
+// Deep verification of code, by the kind of its file, and the identities that it finds. For this folder, and
+// for those who judge its findings; verify.h verifies an artefact of any kind.
 #pragma once
 
+#include <cstdint>
 #include <optional>
 #include <string>
 #include <vector>
 
 #include "codesign/byte_source.h"
+#include "foundation/bytes.h"
 #include "verify/check.h"
 #include "verify/signature_parts.h"
 #include "verify/workers.h"
@@ -33,10 +36,23 @@ struct VerifiedCode {
     std::vector<CodeIdentity> identities;
 };
 
-/// `outside`: files that the special slots of a bundle's main executable cover. An image outside a bundle has
-/// its embedded property list.
+/// Verifies an executable image: every slice, every code directory, every page. `outside`: files that the
+/// special slots of a bundle's main executable cover. An image outside a bundle has its embedded property
+/// list.
 VerifiedCode verifyExecutable(const codesign::ByteSource& source, const OutsideComponents& outside,
                               const std::string& place, Workers& workers, Section& section);
+
+/// Verifies a bundle with all that is in it (bundle.h). Throws codesign::CodeError if the directory has no
+/// main executable, or if it cannot be read.
+VerifiedCode verifyBundle(const std::string& path, Workers& workers, Section& section);
+
+/// Verifies a disk image: its data, its trailer, and its block table as a second check. `source` ends in a
+/// disk image's trailer. An unsigned image has no identity here: its synthetic hash covers all of its data,
+/// so that hash is the whole check.
+VerifiedCode verifyDiskImage(const codesign::ByteSource& source, Workers& workers, Section& section);
+
+/// Verifies a flat package: table of contents, signature, and everything in the heap.
+VerifiedCode verifyPackage(const codesign::ByteSource& source, Workers& workers, Section& section);
 
 /// The identity that `parts` state.
 CodeIdentity identityOf(const SignatureParts& parts, std::string place);
