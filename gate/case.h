@@ -12,7 +12,6 @@
 
 #include "foundation/bytes.h"
 #include "gate/run.h"
-#include "gate/ticket_directory.h"
 #include "retrieval/ticket_fetch.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/PWHashedFile/ticket_place.h"

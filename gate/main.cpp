@@ -19,7 +19,6 @@
 #include "gate/render.h"
 #include "gate/report_file.h"
 #include "gate/run.h"
-#include "gate/ticket_directory.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"

@@ -1,19 +1,21 @@
-// A run over many paths: its options, and the result for each path. Parallel reading, one series of lookups.
+// A run over many paths: its options, the tickets that the caller has fetched, and the result for each path.
+// Parallel reading, one series of lookups.
 #pragma once
 
 #include <cstdint>
 #include <optional>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "foundation/bytes.h"
+#include "foundation/error.h"
 #include "src/platform.h"
 #include "verify/check.h"
+#include "verify/directory.h"
 
 namespace pinwell::gate {
-
-class TicketDirectory;
 
 /// Requirements on an artefact besides being unchanged since signing.
 struct Policy {
@@ -37,6 +39,31 @@ struct Options {
     std::string output;       // a file; empty: standard output
     std::string attestation;  // a file; empty: none
     std::vector<std::string> paths;
+};
+
+/// Maximum length of a ticket, as for stapled tickets.
+inline constexpr std::uint64_t kMaximumTicketFile = std::uint64_t{64} * 1024 * 1024;
+
+/// A directory of tickets that were fetched elsewhere: 2-2-HEX.ticket for the record 2/2/HEX. Immutable; may
+/// be used from any number of threads.
+class TicketDirectory {
+  public:
+    /// Follows a link: the caller chose the directory.
+    static foundation::Result<TicketDirectory> open(const std::string& path);
+
+    struct Found {
+        std::string file;                        // its path, whether it exists or not
+        std::optional<foundation::Data> ticket;  // `nullopt`: there is none
+        std::string problem;                     // why an existing file cannot be read
+    };
+    Found find(const std::string& recordName) const;
+
+  private:
+    TicketDirectory(std::string path, verify::DirectoryRef directory)
+        : path_(std::move(path)), directory_(std::move(directory)) {}
+
+    std::string path_;
+    verify::DirectoryRef directory_;
 };
 
 /// In the order of gravity: the highest of several paths decides the exit status.

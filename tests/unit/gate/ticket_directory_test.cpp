@@ -1,10 +1,9 @@
 // --tickets DIR: tickets that were fetched elsewhere, beside the stapled one.
-#include "gate/ticket_directory.h"
-
 #include <gmock/gmock.h>
 
 #include <filesystem>
 
+#include "gate/run.h"
 #include "gate_fixture.h"
 #include "lumora-local/sample_disk_image.h"
 #include "verify/check.h"
