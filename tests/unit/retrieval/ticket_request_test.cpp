@@ -263,9 +263,9 @@ class WrongRequestAnswer : public Request, public testing::WithParamInterface<Wr
                            }});
         for (const auto& [title, body] : std::vector<std::pair<std::string, std::string>>{
                  {"EmptyBody", ""}, {"Text", "issued"}, {"List", "[]"}, {"Cut", "{\"record\":"}})
-            answers.push_back({title, [body = body](const Members& members) {
+            answers.push_back({title, [wrong = body](const Members& members) {
                                    Reply reply = replyOf(members);
-                                   reply.body = body;
+                                   reply.body = wrong;
                                    return reply;
                                }});
         return answers;
