@@ -329,7 +329,7 @@ TEST_F(BatchResume, ALineThatWasCutShortDoesNotSpoilTheNext) {
     ASSERT_EQ(resume(images).exitStatus, 0);
     const std::string whole = readFile(journal);
     for (std::size_t length = whole.size(); length-- > 0;) {
-        if (length % 23 != 0) continue;  // a run of the program each
+        if (length % 47 != 0) continue;  // two runs of the program each
         writeFile(journal, whole.substr(0, length));
         EXPECT_EQ(resume(images).exitStatus, 0) << length;
         EXPECT_EQ(resumedOf(resume(images)), 3U) << length;
@@ -398,10 +398,10 @@ TEST_F(BatchResume, AnArtefactThatFailsWeighsMoreThanAJournalThatDoes) {
 // Runs that are killed.
 
 TEST_F(BatchResume, AKilledRunGoesOnWhereItWas) {
-    const auto bundles = writeBundles(60);
+    const auto bundles = writeBundles(40);
     serveRecords();
     std::size_t said = 0;  // in runs that were killed: a line of each is in the journal, or was just to be
-    for (const std::size_t last : {0U, 5U, 20U, 40U}) {
+    for (const std::size_t last : {0U, 5U, 15U, 30U}) {
         RunningProcess run(batchCommand(resuming(bundles)));
         // A run that is quicker than the test ends by itself.
         if (last == 0) {
@@ -428,10 +428,10 @@ TEST_F(BatchResume, AKilledRunGoesOnWhereItWas) {
     const auto resumed = resumedOf(last);
     EXPECT_GE(resumed, said);
     EXPECT_GE(said, 1U);
-    EXPECT_EQ(resumed + reportsOf(last).size(), 60U);
-    EXPECT_THAT(askedFor(), SizeIs(60U - resumed));
-    EXPECT_EQ(countStapled(bundles), 60U);
-    EXPECT_EQ(resumedOf(resume(bundles)), 60U);
+    EXPECT_EQ(resumed + reportsOf(last).size(), 40U);
+    EXPECT_THAT(askedFor(), SizeIs(40U - resumed));
+    EXPECT_EQ(countStapled(bundles), 40U);
+    EXPECT_EQ(resumedOf(resume(bundles)), 40U);
 }
 
 // Signals.
@@ -525,8 +525,8 @@ INSTANTIATE_TEST_SUITE_P(Which, BatchSignal,
 // Two at once.
 
 TEST_F(BatchResume, TwoRunsOverOneListStapleEachArtefactWhole) {
-    const auto images = writeImages(60);
-    const auto bundles = writeBundles(20);
+    const auto images = writeImages(30);
+    const auto bundles = writeBundles(10);
     serveRecords();
     std::vector<std::string> arguments{"staple", "--json"};
     for (const auto& paths : {pathsOf(images), pathsOf(bundles)})
@@ -536,9 +536,9 @@ TEST_F(BatchResume, TwoRunsOverOneListStapleEachArtefactWhole) {
     for (RunningProcess* const run : {&first, &second}) {
         const ProcessResult result = run->wait();
         EXPECT_EQ(result.exitStatus, 0) << result.output << result.errors;
-        EXPECT_THAT(reportsOf(result), AllOf(SizeIs(80), Each(Reports("worked", 0))));
+        EXPECT_THAT(reportsOf(result), AllOf(SizeIs(40), Each(Reports("worked", 0))));
     }
-    EXPECT_EQ(countStapled(images) + countStapled(bundles), 80U);
+    EXPECT_EQ(countStapled(images) + countStapled(bundles), 40U);
 }
 
 TEST_F(BatchResume, TwoRunsWithOneJournalKeepItWhole) {

@@ -317,8 +317,8 @@ TEST_F(Batch, ALongListNeedsNoMoreMemory) {
         EXPECT_EQ(result.exitStatus, 66) << result.errors;
         return std::stoul(result.output);
     };
-    const auto few = memoryFor(1000);
-    EXPECT_LE(memoryFor(10'000), few + 16 * 1024) << "36 MB of list";
+    const auto few = memoryFor(500);
+    EXPECT_LE(memoryFor(6000), few + 16 * 1024) << "22 MB of list";
 }
 
 TEST_F(Batch, TheProgressLineFitsATerminalOfAnyWidth) {

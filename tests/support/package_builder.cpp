@@ -53,7 +53,9 @@ PackageBuilder& PackageBuilder::append(const Data& bytes) {
 }
 
 std::string PackageBuilder::build() const {
-    return foundation::toString(archive_) + foundation::toString(trailers_);
+    std::string package(foundation::asText(archive_));
+    package += foundation::asText(trailers_);
+    return package;
 }
 
 }  // namespace pinwell::test

@@ -3,9 +3,9 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
-#include <iterator>
 #include <stdexcept>
 #include <system_error>
+#include <vector>
 
 namespace pinwell::test {
 
@@ -29,13 +29,18 @@ void writeFile(const std::string& path, std::string_view contents) {
 }
 
 void writeFile(const std::string& path, foundation::ByteView contents) {
-    writeFile(path, foundation::toString(contents));
+    writeFile(path, foundation::asText(contents));
 }
 
 std::string readFile(const std::string& path) {
     std::ifstream file(path, std::ios::binary);
     if (!file) throw std::runtime_error("cannot read " + path);
-    return {std::istreambuf_iterator<char>(file), {}};
+    std::string contents;
+    std::vector<char> piece(std::size_t{64} * 1024);
+    while (file.read(piece.data(), static_cast<std::streamsize>(piece.size())) || file.gcount() > 0)
+        contents.append(piece.data(), static_cast<std::size_t>(file.gcount()));
+    if (file.bad()) throw std::runtime_error("cannot read " + path);
+    return contents;
 }
 
 }  // namespace pinwell::test

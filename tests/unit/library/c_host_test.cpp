@@ -72,7 +72,7 @@ TEST(CHost, FreesAHandleOnceHoweverManyThreadsFreeIt) {
 }
 
 TEST(CHost, LeavesNothingOpenAndNoThreadBehind) {
-    const VectorArtefacts artefacts;
+    const VectorArtefacts& artefacts = VectorArtefacts::shared();
     const CRoots roots = cRoots(VectorArtefacts::platform());
     verified(kGood[0], roots);
     const std::size_t descriptors = openDescriptors();
@@ -90,7 +90,7 @@ TEST(CHost, LeavesNothingOpenAndNoThreadBehind) {
 
 TEST(CHost, PrintsNothing) {
     const CRoots roots = cRoots(VectorArtefacts::platform());
-    const VectorArtefacts artefacts;
+    const VectorArtefacts& artefacts = VectorArtefacts::shared();
     testing::internal::CaptureStdout();
     testing::internal::CaptureStderr();
     for (const Vector& vector : artefacts.all()) {

@@ -279,7 +279,7 @@ TEST_F(CInterface, TrustsNothingWithoutRoots) {
 }
 
 TEST_F(CInterface, SaysWhyATicketIsRefused) {
-    const VectorArtefacts artefacts;
+    const VectorArtefacts& artefacts = VectorArtefacts::shared();
     const auto reason = [&](std::string_view name) {
         const CResult found = judged(artefacts.named(name), roots);
         EXPECT_EQ(pinwell_result_verdict(found.get()), PINWELL_VERDICT_REFUSED);

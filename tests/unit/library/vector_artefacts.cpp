@@ -19,6 +19,11 @@ VectorArtefacts::VectorArtefacts() {
     for (std::size_t i = 0; i < paths.size(); ++i) vectors_.push_back({vectors[i], paths[i]});
 }
 
+const VectorArtefacts& VectorArtefacts::shared() {
+    static const VectorArtefacts artefacts;
+    return artefacts;
+}
+
 const std::string& VectorArtefacts::named(std::string_view name) const {
     for (const Vector& vector : vectors_)
         if (*vector.expected["name"].string() == name) return vector.path;

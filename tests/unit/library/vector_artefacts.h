@@ -1,4 +1,4 @@
-// The artefacts of the test vectors (tests/vectors), made for one test.
+// The artefacts of the test vectors (tests/vectors), made once for a program. Tests only read them.
 #pragma once
 
 #include <string>
@@ -16,8 +16,8 @@ struct Vector {
 
 class VectorArtefacts {
   public:
-    /// Throws if they cannot be made.
-    VectorArtefacts();
+    /// Made by the first call; throws if they cannot be made.
+    static const VectorArtefacts& shared();
 
     const std::vector<Vector>& all() const noexcept { return vectors_; }
 
@@ -28,6 +28,8 @@ class VectorArtefacts {
     static std::string platform();
 
   private:
+    VectorArtefacts();
+
     TemporaryDirectory directory_;
     std::vector<Vector> vectors_;
 };

@@ -49,7 +49,7 @@ class Vectors : public testing::Test {
         EXPECT_NE(textOf(pinwell_result_reason, result), "");
     }
 
-    const VectorArtefacts artefacts;
+    const VectorArtefacts& artefacts = VectorArtefacts::shared();
     const CRoots roots = cRoots(VectorArtefacts::platform());
 };
 
