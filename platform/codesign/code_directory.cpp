@@ -100,7 +100,53 @@ void checkScatter(const ByteReader& whole, const Header& header) {
     }
 }
 
+struct DigestFacts {
+    crypto::Digest algorithm;
+    std::size_t size;
+    std::size_t codeHashSize;
+    int strength;
+};
+
+DigestFacts factsOf(DigestType type) {
+    switch (type) {
+        case DigestType::sha1:
+            return {crypto::Digest::sha1, 20, 20, 1};
+        case DigestType::sha256Truncated:
+            return {crypto::Digest::sha256, 20, 20, 2};
+        case DigestType::sha256:
+            return {crypto::Digest::sha256, 32, 20, 3};
+        case DigestType::sha384:
+            break;
+    }
+    return {crypto::Digest::sha384, 48, 48, 4};
+}
+
 }  // namespace
+
+std::optional<DigestType> digestTypeNumbered(std::uint8_t number) {
+    if (number < 1 || number > 4) return std::nullopt;
+    return static_cast<DigestType>(number);
+}
+
+crypto::Digest algorithmOf(DigestType type) {
+    return factsOf(type).algorithm;
+}
+
+std::size_t digestSize(DigestType type) {
+    return factsOf(type).size;
+}
+
+std::size_t codeHashSize(DigestType type) {
+    return factsOf(type).codeHashSize;
+}
+
+int digestStrength(DigestType type) {
+    return factsOf(type).strength;
+}
+
+Data digest(DigestType type, ByteView bytes) {
+    return foundation::toData(crypto::threadHasher(algorithmOf(type)).of(bytes).first(digestSize(type)));
+}
 
 std::size_t codeDirectoryHeaderSize(std::uint32_t version) {
     if (version >= kVersionWithRuntime) return 96;
@@ -157,59 +203,6 @@ Data CodeDirectory::codeHash() const {
     Data hash = digest(digestType_, bytes_);
     hash.resize(codeHashSize(digestType_));
     return hash;
-}
-
-std::optional<DigestType> digestTypeNumbered(std::uint8_t number) {
-    if (number < 1 || number > 4) return std::nullopt;
-    return static_cast<DigestType>(number);
-}
-
-crypto::Digest algorithmOf(DigestType type) {
-    switch (type) {
-        case DigestType::sha1:
-            return crypto::Digest::sha1;
-        case DigestType::sha256:
-        case DigestType::sha256Truncated:
-            return crypto::Digest::sha256;
-        case DigestType::sha384:
-            break;
-    }
-    return crypto::Digest::sha384;
-}
-
-std::size_t digestSize(DigestType type) {
-    switch (type) {
-        case DigestType::sha1:
-        case DigestType::sha256Truncated:
-            return 20;
-        case DigestType::sha256:
-            return 32;
-        case DigestType::sha384:
-            return 48;
-    }
-    return 0;
-}
-
-std::size_t codeHashSize(DigestType type) {
-    return type == DigestType::sha384 ? 48 : 20;
-}
-
-int digestStrength(DigestType type) {
-    switch (type) {
-        case DigestType::sha1:
-            return 1;
-        case DigestType::sha256Truncated:
-            return 2;
-        case DigestType::sha256:
-            return 3;
-        case DigestType::sha384:
-            return 4;
-    }
-    return 0;
-}
-
-Data digest(DigestType type, ByteView bytes) {
-    return foundation::toData(crypto::threadHasher(algorithmOf(type)).of(bytes).first(digestSize(type)));
 }
 
 }  // namespace pinwell::codesign

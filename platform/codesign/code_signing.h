@@ -26,7 +26,7 @@ using foundation::URL;
 /// A platform status; 0 is success.
 using Status = std::int32_t;
 inline constexpr Status kSuccess = 0;
-inline constexpr Status kParameterError = -50;
+using foundation::kParameterError;  // -50
 inline constexpr Status kUnimplemented = -67072;
 inline constexpr Status kStaticCodeNotFound = -67070;  // no file that could be code
 inline constexpr Status kInvalidSignature = -67061;    // a signature is present but wrong

@@ -32,7 +32,7 @@ using foundation::Result;
 /// A platform status; 0 is success.
 using Status = std::int32_t;
 inline constexpr Status kSuccess = 0;
-inline constexpr Status kParameterError = -50;
+using foundation::kParameterError;                 // -50
 inline constexpr Status kSignatureError = -67688;  // a signature did not verify
 
 /// Verdict numbers of an evaluation.
