@@ -27,36 +27,36 @@ struct PolicyReleaser {
 };
 using PolicyHandle = std::unique_ptr<const ostrel_policy, PolicyReleaser>;
 
-std::optional<std::string> copyString(const char* text) {
+std::optional<std::string> ownedString(const char* text) {
     if (text == nullptr) return std::nullopt;
     const std::size_t length = strnlen(text, OSTREL_MAXIMUM_STRING + 1);
     if (length > OSTREL_MAXIMUM_STRING) return std::nullopt;
     return std::string(text, length);
 }
 
-std::optional<Value> copyList(const ostrel_policy_option& option) {
+std::optional<Value> ownedList(const ostrel_policy_option& option) {
     if (option.value.strings == nullptr && option.count != 0) return std::nullopt;
     Array list;
     for (std::uint32_t i = 0; i < option.count; ++i) {
-        std::optional<std::string> text = copyString(option.value.strings[i]);
+        std::optional<std::string> text = ownedString(option.value.strings[i]);
         if (!text) return std::nullopt;
         list.emplace_back(std::move(*text));
     }
     return Value(std::move(list));
 }
 
-std::optional<Value> copyDictionary(const ostrel_policy_option& option) {
+std::optional<Value> ownedDictionary(const ostrel_policy_option& option) {
     if (option.value.numbers == nullptr && option.count != 0) return std::nullopt;
     Dictionary dictionary;
     for (std::uint32_t i = 0; i < option.count; ++i) {
         const ostrel_named_number& entry = option.value.numbers[i];
-        std::optional<std::string> name = copyString(entry.name);
+        std::optional<std::string> name = ownedString(entry.name);
         if (!name || !dictionary.emplace(std::move(*name), entry.number).second) return std::nullopt;
     }
     return Value(std::move(dictionary));
 }
 
-std::optional<Value> copyValue(const ostrel_policy_option& option) {
+std::optional<Value> ownedValue(const ostrel_policy_option& option) {
     if (option.count > OSTREL_MAXIMUM_ENTRIES) return std::nullopt;
     switch (option.type) {
         case OSTREL_OPTION_BOOLEAN:
@@ -65,14 +65,14 @@ std::optional<Value> copyValue(const ostrel_policy_option& option) {
         case OSTREL_OPTION_NUMBER:
             return Value(option.value.number);
         case OSTREL_OPTION_STRING: {
-            std::optional<std::string> text = copyString(option.value.string);
+            std::optional<std::string> text = ownedString(option.value.string);
             if (!text) return std::nullopt;
             return Value(std::move(*text));
         }
         case OSTREL_OPTION_STRING_LIST:
-            return copyList(option);
+            return ownedList(option);
         case OSTREL_OPTION_NUMBER_DICTIONARY:
-            return copyDictionary(option);
+            return ownedDictionary(option);
         default:
             return std::nullopt;
     }
@@ -84,17 +84,17 @@ PolicyRef convertPolicy(const ostrel_policy& object) {
     if (object.version != OSTREL_POLICY_VERSION || object.option_count > OSTREL_MAXIMUM_OPTIONS)
         return nullptr;
     if (object.options == nullptr && object.option_count != 0) return nullptr;
-    std::optional<std::string> oid = copyString(object.oid);
+    std::optional<std::string> oid = ownedString(object.oid);
     if (!oid) return nullptr;
     Policy policy{std::move(*oid), std::nullopt, {}};
     if (object.name != nullptr) {
-        policy.name = copyString(object.name);
+        policy.name = ownedString(object.name);
         if (!policy.name) return nullptr;
     }
     for (std::uint32_t i = 0; i < object.option_count; ++i) {
-        std::optional<std::string> key = copyString(object.options[i].key);
+        std::optional<std::string> key = ownedString(object.options[i].key);
         if (!key) return nullptr;
-        std::optional<Value> value = copyValue(object.options[i]);
+        std::optional<Value> value = ownedValue(object.options[i]);
         if (!value || !policy.options.emplace(std::move(*key), std::move(*value)).second) return nullptr;
     }
     return std::make_shared<const Policy>(std::move(policy));
