@@ -2,7 +2,6 @@
 
 #include <malloc.h>
 #include <openssl/crypto.h>
-#include <openssl/evp.h>
 
 #include <algorithm>
 #include <array>
@@ -11,7 +10,7 @@
 #include <map>
 #include <new>
 
-#include "foundation/handle.h"
+#include "crypto/openssl.h"
 
 namespace pinwell::crypto {
 namespace {
@@ -55,8 +54,8 @@ std::size_t digestSize(Digest digest) {
 }
 
 struct Hasher::State {
-    foundation::Handle<EVP_MD, EVP_MD_free> algorithm;
-    foundation::Handle<EVP_MD_CTX, EVP_MD_CTX_free> context;
+    Handle<EVP_MD, EVP_MD_free> algorithm;
+    Handle<EVP_MD_CTX, EVP_MD_CTX_free> context;
     std::array<unsigned char, EVP_MAX_MD_SIZE> value{};
     bool isFresh = false;  // initialised, and nothing hashed yet
 };
@@ -110,6 +109,7 @@ Data digestOf(Digest digest, ByteView bytes) {
 }
 
 std::optional<Data> availableDigestOf(Digest digest, ByteView bytes) {
+    const ErrorQueueGuard guard;
     try {
         return digestOf(digest, bytes);
     } catch (const std::bad_alloc&) {
