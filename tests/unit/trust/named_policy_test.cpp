@@ -27,8 +27,10 @@ PolicyRef found(const std::string& sort) {
 const std::optional<PolicyRef> kUnavailable = std::nullopt;
 const std::optional<PolicyRef> kRefused = PolicyRef();
 
+/// The emulator is empty unless the tests are compiled for another processor.
 std::string probe(const std::string& directory) {
-    const std::string command = "LD_LIBRARY_PATH='" + directory + "' '" + NAMED_POLICY_PROBE + "'";
+    const std::string command =
+        "LD_LIBRARY_PATH='" + directory + "' " + EMULATOR + " '" + NAMED_POLICY_PROBE + "'";
     FILE* const pipe = popen(command.c_str(), "r");
     std::array<char, 256> line{};
     const std::size_t size = fread(line.data(), 1, line.size(), pipe);
