@@ -16,13 +16,6 @@ struct Artefact {
     std::vector<CodeHash> hashes;
 };
 
-/// Whether a ticket for an artefact with this own hash can list `hash` as well.
-bool canListWith(const CodeHash& own, const CodeHash& hash);
-
-/// Joins an artefact's own hash with the other hashes found in it: no duplicates, and only hashes that a
-/// ticket with this own hash can list.
-std::vector<CodeHash> hashesForTicket(const CodeHash& own, const std::vector<CodeHash>& found);
-
 class ArtefactHasher {
   public:
     virtual ~ArtefactHasher() = default;

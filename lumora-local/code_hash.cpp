@@ -1,12 +1,14 @@
 #include "lumora-local/code_hash.h"
 
 #include "foundation/hex.h"
+#include "src/tm_ticket.h"
 
 namespace pinwell::lumora {
+
 std::optional<std::size_t> hashLength(std::uint32_t algorithm) {
-    if (algorithm <= 3) return 20;
-    if (algorithm == 4) return 48;
-    return std::nullopt;
+    const std::size_t length = tm_cdhash_algorithm_get_size(algorithm);
+    if (length == 0) return std::nullopt;
+    return length;
 }
 
 std::string recordName(const CodeHash& hash) {

@@ -128,7 +128,7 @@ Change putOne(RecordStore& store, const TicketSigner& signer, Environment enviro
 Change issueDescribed(RecordStore& store, const TicketSigner& signer, Environment environment,
                       const DescribedArtefact& artefact, const Occasion& occasion) {
     Record record = recordOfName(recordName(artefact.own), artefact.label);
-    record.hashes = hashesForTicket(artefact.own, artefact.others);
+    record.hashes = listableHashes(artefact.own, artefact.others);
     return putOne(store, signer, environment, std::move(record), occasion);
 }
 

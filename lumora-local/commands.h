@@ -56,7 +56,7 @@ std::vector<Record> revoke(const Registry& registry, const RevokeRequest& reques
 struct DescribedArtefact {
     std::string label;  // empty: the record's name
     CodeHash own;
-    std::vector<CodeHash> others;  // that the ticket is to list as well; hashesForTicket() joins them
+    std::vector<CodeHash> others;  // that the ticket is to list as well; listableHashes() joins them
 };
 
 /// The result of one change.

@@ -8,6 +8,7 @@
 #include "foundation/url.h"
 #include "lumora-local/failure.h"
 #include "src/PWHashedFile/PWHashedFile.h"
+#include "src/cdhash_extract.h"
 #include "src/host_platform.h"
 #include "src/messages.h"
 

@@ -56,4 +56,15 @@ foundation::Dictionary basicCodeProperties(const foundation::URL& fileURL, const
     return properties;
 }
 
+std::vector<CodeHash> listableHashes(const CodeHash& own, const foundation::URL& artefact,
+                                     const codesign::CodeSigningService& codeSigning) {
+    const auto all = codeSigning.allCodeHashes(artefact);
+    if (!all) return {own};
+    std::vector<CodeHash> found;
+    for (const codesign::SigningInformation& code : *all)
+        for (std::size_t i = 0; i < code.cdHashes.size() && i < code.digestAlgorithms.size(); ++i)
+            found.push_back({code.digestAlgorithms[i], code.cdHashes[i]});
+    return listableHashes(own, found);
+}
+
 }  // namespace pinwell

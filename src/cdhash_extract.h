@@ -1,8 +1,11 @@
 // The few properties of a code signature that the tool needs, above all the cdhash.
 #pragma once
 
+#include <vector>
+
 #include "foundation/url.h"
 #include "foundation/value.h"
+#include "src/code_hashes.h"
 #include "src/platform.h"
 
 namespace pinwell {
@@ -19,5 +22,11 @@ inline constexpr std::string_view kFlagsKey = "flags";                      // n
 /// reported; a failure of the code-signing service itself goes to the system log. Never prints, never changes
 /// an exit code.
 foundation::Dictionary basicCodeProperties(const foundation::URL& fileURL, const Platform& platform);
+
+/// The hashes that a ticket with this own hash can list (code_hashes.h): those of all slices and of nested
+/// code of the artefact at this path. An unsigned disk image or a package has only its own. Reads files;
+/// blocks.
+std::vector<CodeHash> listableHashes(const CodeHash& own, const foundation::URL& artefact,
+                                     const codesign::CodeSigningService& codeSigning);
 
 }  // namespace pinwell

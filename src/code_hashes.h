@@ -5,9 +5,7 @@
 #include <cstdint>
 #include <vector>
 
-#include "codesign/code_signing.h"
 #include "foundation/bytes.h"
-#include "foundation/url.h"
 
 namespace pinwell {
 
@@ -20,13 +18,11 @@ struct CodeHash {
     auto operator<=>(const CodeHash&) const = default;
 };
 
+/// Whether a ticket for an artefact with this own hash can list `hash` as well.
+bool canListWith(const CodeHash& own, const CodeHash& hash);
+
 /// Joins an artefact's own hash with the other hashes found in it: its own first, without duplicates. Leaves
 /// out hashes that a ticket with this own hash cannot list.
 std::vector<CodeHash> listableHashes(const CodeHash& own, const std::vector<CodeHash>& found);
-
-/// The same with the hashes of all slices and of nested code of the artefact at this path. An unsigned disk
-/// image or a package has only its own. Reads files; blocks.
-std::vector<CodeHash> listableHashes(const CodeHash& own, const foundation::URL& artefact,
-                                     const codesign::CodeSigningService& codeSigning);
 
 }  // namespace pinwell

@@ -11,7 +11,7 @@
 #include "https/session_options.h"
 #include "retrieval/ticket_request.h"
 #include "src/PWHashedFile/PWHashedFile.h"
-#include "src/code_hashes.h"
+#include "src/cdhash_extract.h"
 #include "ticket/command_parts.h"
 #include "ticket/commands.h"
 #include "ticket/ticket_files.h"

@@ -39,7 +39,7 @@ CodeHash hashOf(std::uint32_t algorithm, int fill) {
 }
 
 Artefact artefact(std::string label, const CodeHash& own, const std::vector<CodeHash>& others = {}) {
-    return {std::move(label), own, hashesForTicket(own, others)};
+    return {std::move(label), own, listableHashes(own, others)};
 }
 
 IssueRequest artefacts(std::vector<std::string> paths, bool asAsset = false) {
@@ -229,18 +229,6 @@ TEST_F(CommandsTest, ListsForPrograms) {
     EXPECT_EQ(record["hashes"][0]["algorithm"].unsignedIntegerValue(), 4U);
     EXPECT_EQ(record["label"].string()->find('\n'), std::string::npos);
     EXPECT_EQ(recordsAsJson({}), "{\"records\":[]}\n");
-}
-
-TEST(HashesForTicket, BeginsWithTheOwnHashAndRepeatsNothing) {
-    EXPECT_EQ(hashesForTicket(hashOf(2, 1), {hashOf(4, 2), hashOf(2, 1), hashOf(4, 2), hashOf(1, 1)}),
-              (std::vector<CodeHash>{hashOf(2, 1), hashOf(4, 2), hashOf(1, 1)}));
-}
-
-TEST(HashesForTicket, PassesOverWhatATicketCannotList) {
-    EXPECT_EQ(hashesForTicket(hashOf(2, 1), {{5, Data(20)}, {2, Data(32)}, hashOf(0, 1)}),
-              (std::vector<CodeHash>{hashOf(2, 1)}));
-    EXPECT_EQ(hashesForTicket(hashOf(0, 1), {hashOf(2, 1), hashOf(4, 1)}),
-              (std::vector<CodeHash>{hashOf(0, 1)}));
 }
 
 }  // namespace

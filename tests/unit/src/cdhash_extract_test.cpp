@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include "support/fake_code_signing.h"
 #include "support/message_capture.h"
 #include "support/test_platform.h"
 
@@ -124,6 +125,33 @@ TEST_F(BasicCodeProperties, AreEmptyAndLoggedWithoutAUniqueHash) {
     EXPECT_EQ(properties(), Value(Dictionary{}));
     ASSERT_EQ(platform.systemLog.entries().size(), 1U);
     EXPECT_EQ(platform.systemLog.entries()[0], "Unable to extract cdhash from signing information");
+}
+
+CodeHash codeHash(std::uint32_t algorithm, int fill) {
+    return {algorithm, Data(algorithm == 4 ? 48 : 20, static_cast<std::byte>(fill))};
+}
+
+class HashesOfAnArtefact : public testing::Test {
+  protected:
+    HashesOfAnArtefact() {
+        codeSigning.information.emplace();
+        codeSigning.information->cdHashes = {codeHash(1, 2).hash, codeHash(2, 1).hash, codeHash(4, 3).hash};
+        codeSigning.information->digestAlgorithms = {1, 2};  // the third one has none
+    }
+    std::vector<CodeHash> hashes() {
+        return listableHashes(codeHash(2, 1), foundation::URL::fileURLWithPath("/artefact"), codeSigning);
+    }
+
+    test::FakeCodeSigningService codeSigning;
+};
+
+TEST_F(HashesOfAnArtefact, AreThoseOfAllItsCode) {
+    EXPECT_EQ(hashes(), (std::vector<CodeHash>{codeHash(2, 1), codeHash(1, 2)}));
+}
+
+TEST_F(HashesOfAnArtefact, AreItsOwnAloneIfItsCodeCannotBeWalked) {
+    codeSigning.informationStatus = codesign::kUnimplemented;
+    EXPECT_EQ(hashes(), (std::vector<CodeHash>{codeHash(2, 1)}));
 }
 
 }  // namespace
