@@ -15,7 +15,7 @@
 #include <unordered_map>
 #include <vector>
 
-#include "lumora-local/environment.h"
+#include "lumora-local/record_name.h"
 
 namespace pinwell::lumora {
 

@@ -4,7 +4,7 @@
 #include <string>
 #include <vector>
 
-#include "lumora-local/code_hash.h"
+#include "lumora-local/record_name.h"
 
 namespace pinwell::lumora {
 

@@ -23,7 +23,7 @@
 #include <vector>
 
 #include "foundation/date.h"
-#include "lumora-local/environment.h"
+#include "lumora-local/record_name.h"
 
 namespace pinwell::lumora {
 

@@ -9,8 +9,8 @@
 #include <string>
 #include <vector>
 
-#include "lumora-local/environment.h"
 #include "lumora-local/event.h"
+#include "lumora-local/record_name.h"
 #include "lumora-local/record_store.h"
 
 namespace pinwell::lumora {

@@ -4,9 +4,9 @@
 
 #include "foundation/format.h"
 #include "lumora-local/admin_routes.h"
-#include "lumora-local/code_hash.h"
 #include "lumora-local/page.h"
 #include "lumora-local/problem.h"
+#include "lumora-local/record_name.h"
 
 namespace pinwell::lumora {
 namespace {

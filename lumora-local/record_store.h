@@ -12,10 +12,9 @@
 
 #include "foundation/bytes.h"
 #include "foundation/date.h"
-#include "lumora-local/code_hash.h"
-#include "lumora-local/environment.h"
 #include "lumora-local/event.h"
 #include "lumora-local/failure.h"
+#include "lumora-local/record_name.h"
 
 namespace pinwell::lumora {
 

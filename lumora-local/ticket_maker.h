@@ -29,7 +29,7 @@
 
 #include "foundation/bytes.h"
 #include "foundation/date.h"
-#include "lumora-local/code_hash.h"
+#include "lumora-local/record_name.h"
 #include "lumora-local/signing_key.h"
 
 namespace pinwell::lumora {

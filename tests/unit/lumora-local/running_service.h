@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "lumora-local/code_hash.h"
+#include "lumora-local/record_name.h"
 #include "lumora-local/record_store.h"
 #include "lumora-local/service_directory.h"
 #include "support/temporary_directory.h"

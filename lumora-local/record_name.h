@@ -1,4 +1,4 @@
-// The hash that a ticket lists, and the name of the record with the ticket.
+// What identifies a record: the name, made from the hash that its ticket lists, and the set that it is in.
 #pragma once
 
 #include <cstdint>
@@ -21,5 +21,13 @@ std::string recordName(const CodeHash& hash);
 /// The hash in such a name; `nullopt` for any other text, also for upper-case digits and wrong
 /// lengths.
 std::optional<CodeHash> parseRecordName(std::string_view name);
+
+/// The two sets of records that a service keeps apart.
+enum class Environment { production, development };
+
+std::string_view toString(Environment environment);
+
+/// `nullopt` for any other text.
+std::optional<Environment> parseEnvironment(std::string_view text);
 
 }  // namespace pinwell::lumora

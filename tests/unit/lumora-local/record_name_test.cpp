@@ -1,4 +1,4 @@
-#include "lumora-local/code_hash.h"
+#include "lumora-local/record_name.h"
 
 #include <gtest/gtest.h>
 

@@ -1,10 +1,9 @@
-#include "lumora-local/code_hash.h"
+#include "lumora-local/record_name.h"
 
 #include "foundation/hex.h"
 #include "src/tm_ticket.h"
 
 namespace pinwell::lumora {
-
 std::optional<std::size_t> hashLength(std::uint32_t algorithm) {
     const std::size_t length = tm_cdhash_algorithm_get_size(algorithm);
     if (length == 0) return std::nullopt;
@@ -34,6 +33,16 @@ std::optional<CodeHash> parseRecordName(std::string_view name) {
     if (!hash) return std::nullopt;
     parsed.hash = *std::move(hash);
     return parsed;
+}
+
+std::string_view toString(Environment environment) {
+    return environment == Environment::production ? "production" : "development";
+}
+
+std::optional<Environment> parseEnvironment(std::string_view text) {
+    if (text == toString(Environment::production)) return Environment::production;
+    if (text == toString(Environment::development)) return Environment::development;
+    return std::nullopt;
 }
 
 }  // namespace pinwell::lumora
