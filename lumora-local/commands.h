@@ -6,7 +6,7 @@
 #include <vector>
 
 #include "foundation/date.h"
-#include "lumora-local/artefact.h"
+#include "lumora-local/artefact_hasher.h"
 #include "lumora-local/record_store.h"
 #include "lumora-local/ticket_maker.h"
 

@@ -1,6 +1,7 @@
 // An artefact for the service: the hash that names its record, and all hashes that its ticket lists.
 #pragma once
 
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -24,5 +25,10 @@ class ArtefactHasher {
     /// is of no supported kind or has no hash.
     virtual Artefact examine(const std::string& path) = 0;
 };
+
+/// Reads artefacts with the tool's own code, so the service and the tool always use the same name for a
+/// record. Silences the tool's message functions for the whole process: the Failure has their text. Part of
+/// the program only, and not of the service's library.
+std::unique_ptr<ArtefactHasher> makePinwellArtefactHasher();
 
 }  // namespace pinwell::lumora

@@ -1,4 +1,4 @@
-#include "lumora-local/pinwell_artefact_hasher.h"
+#include "lumora-local/artefact_hasher.h"
 
 #include <filesystem>
 #include <system_error>
