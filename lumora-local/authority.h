@@ -54,7 +54,7 @@ Authority createAuthority(const std::vector<std::string>& hosts, foundation::Dat
 struct IssuerFiles {
     std::string certificate;
     std::string key;
-    std::string passphraseFile;  // passphrase.h; empty: the key is in the clear
+    std::string passphraseFile;  // key_file.h; empty: the key is in the clear
 };
 
 /// A fresh signer. Throws Failure, also if key and certificate of the issuer do not belong together.

@@ -8,7 +8,7 @@
 #include "lumora-local/client_certificate.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
-#include "lumora-local/passphrase.h"
+#include "lumora-local/key_file.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -11,7 +11,7 @@
 #include "lumora-local/certificate_file.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
-#include "lumora-local/passphrase.h"
+#include "lumora-local/key_file.h"
 #include "lumora-local/rfc3339.h"
 #include "lumora-local/signer_chain.h"
 

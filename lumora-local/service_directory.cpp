@@ -16,7 +16,7 @@
 #include "lumora-local/authority.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
-#include "lumora-local/passphrase.h"
+#include "lumora-local/key_file.h"
 #include "lumora-local/sqlite_store.h"
 
 namespace pinwell::lumora {

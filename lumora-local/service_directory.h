@@ -28,7 +28,7 @@ namespace pinwell::lumora {
 struct NewService {
     std::vector<std::string> hosts;     // canonical; empty: the three names of this machine's loopback
     std::uint16_t port = kDefaultPort;  // for clients, on the first host
-    std::string passphraseFile{};       // passphrase.h; empty: keys are unencrypted
+    std::string passphraseFile{};       // key_file.h; empty: keys are unencrypted
     std::string rootDirectory{};  // made for root.pem and root.key; empty: root.key stays in the service
     std::string signerRequest{};  // made: a request (RFC 2986) for the signer's certificate; empty: the
                                   // service's own authority certifies the signer

@@ -8,7 +8,7 @@
 #include "foundation/format.h"
 #include "lumora-local/endpoint.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/passphrase.h"
+#include "lumora-local/key_file.h"
 
 namespace pinwell::lumora {
 namespace {

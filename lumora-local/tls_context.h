@@ -12,7 +12,7 @@ class context;
 namespace pinwell::lumora {
 
 /// PEM files: the certificate chain with the server's certificate first, and its key. If the key is
-/// encrypted, the passphrase at `passphraseFile` (passphrase.h) opens it. With `clientAuthorities`, a file
+/// encrypted, the passphrase at `passphraseFile` (key_file.h) opens it. With `clientAuthorities`, a file
 /// with their certificates, each client must send a certificate (client_certificate.h).
 struct TlsFiles {
     std::string certificate;

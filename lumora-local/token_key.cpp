@@ -11,8 +11,8 @@
 #include <optional>
 #include <vector>
 
+#include "lumora-local/key_file.h"
 #include "lumora-local/openssl_handles.h"
-#include "lumora-local/passphrase.h"
 
 namespace pinwell::lumora {
 namespace {

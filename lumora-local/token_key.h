@@ -2,7 +2,7 @@
 //
 // The URI (RFC 7512) names the token by `token`, `serial`, `manufacturer` or `model`, and the key by `object`
 // (its label) or `id`. `module-path` names the token's library; without it, the libraries in p11-kit's
-// configuration are used. `pin-source` is a file with the PIN, or "credential:NAME" (passphrase.h). A PIN in
+// configuration are used. `pin-source` is a file with the PIN, or "credential:NAME" (key_file.h). A PIN in
 // the URI itself is refused. Exactly one private EC key on P-256 must match; the token must also have its
 // public key.
 #pragma once
