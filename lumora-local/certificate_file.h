@@ -1,7 +1,9 @@
-// Certificates in PEM files. Includes OpenSSL's headers: for .cpp files of this folder.
+// Certificates that exist already: reading them from PEM files, their names and dates, and the conditions of
+// ticket readers on a signer's chain. Includes OpenSSL's headers: for .cpp files of this folder.
 #pragma once
 
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -23,5 +25,14 @@ std::int64_t expiryOf(X509* certificate);
 
 /// The subject's common name, for messages; the whole subject if it has none.
 std::string nameOf(X509* certificate);
+
+/// The fault of the chain signer, intermediate, root; `nullopt` if clients that trust the root accept its
+/// tickets. Dates do not count, as for tickets.
+std::optional<std::string> faultOfSignerChain(const std::vector<CertificateHandle>& chain);
+
+/// The fault of `certificate` as a certificate issued by `issuer`; `nullopt` if it has none.
+std::optional<std::string> faultOfIssue(X509* certificate, X509* issuer);
+
+bool carriesMarker(X509* certificate, std::string_view oid);
 
 }  // namespace pinwell::lumora

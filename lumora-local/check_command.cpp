@@ -17,7 +17,6 @@
 #include "lumora-local/history.h"
 #include "lumora-local/key_file.h"
 #include "lumora-local/rfc3339.h"
-#include "lumora-local/signer_chain.h"
 #include "lumora-local/store_opening.h"
 
 namespace pinwell::lumora {

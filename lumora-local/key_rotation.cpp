@@ -13,7 +13,6 @@
 #include "lumora-local/file_writing.h"
 #include "lumora-local/key_file.h"
 #include "lumora-local/rfc3339.h"
-#include "lumora-local/signer_chain.h"
 
 namespace pinwell::lumora {
 namespace {
