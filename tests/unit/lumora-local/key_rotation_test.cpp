@@ -1,5 +1,5 @@
 // Keys that are encrypted, stored elsewhere, certified elsewhere and replaced; and the check of a service.
-#include "lumora-local/key_rotation.h"
+#include "lumora-local/key_commands.h"
 
 #include <gtest/gtest.h>
 #include <sys/stat.h>

@@ -1,9 +1,15 @@
-// Renews the keys of a service, and installs certificates of another authority.
+// The commands that make keys and certificates for a service: rotate, certify, client-certificate.
 //
-// New files get new names. Last, service.json is replaced in one step and names them. So a reader finds
-// either the old keys and certificates or the new ones. The old files remain for processes that have read the
-// old service.json. A ticket contains its own chain, so earlier tickets stay genuine while clients trust the
-// root.
+// rotate and certify give new files new names. Last, service.json is replaced in one step and names them. So
+// a reader finds either the old keys and certificates or the new ones. The old files remain for processes
+// that have read the old service.json. A ticket contains its own chain, so earlier tickets stay genuine while
+// clients trust the root.
+//
+// client-certificate has an authority of its own, for clients of the administration listener only: no other
+// part of the service trusts it.
+//
+//   DIR/service/clients/ca.pem   the authority's certificate, for --client-ca
+//   DIR/service/clients/ca.key   its key, encrypted like the service's other keys
 #pragma once
 
 #include <string>
@@ -38,5 +44,14 @@ RotationReport rotateServer(const ServiceDirectory& directory, const std::string
 /// nothing is changed.
 RotationReport certifySignerElsewhere(const ServiceDirectory& directory, const std::string& chainFile,
                                       const std::string& key, foundation::Date now);
+
+/// The path of the authority's certificate, present or future.
+std::string clientAuthorityPath(const ServiceDirectory& directory);
+
+/// Makes `folder`, which must be missing or empty, with client.pem and client.key (mode 0600, unencrypted)
+/// for a client of that name. The first call also makes the authority. Throws Failure: EX_USAGE if the name
+/// is not 1 to 64 bytes of UTF-8 without control characters.
+void makeClientCertificate(const ServiceDirectory& directory, const std::string& name,
+                           const std::string& folder, foundation::Date now);
 
 }  // namespace pinwell::lumora
