@@ -1,4 +1,4 @@
-#include "lumora-local/metrics_listener.h"
+#include "lumora-local/metrics.h"
 
 #include <atomic>
 #include <boost/asio/io_context.hpp>
@@ -16,7 +16,6 @@
 #include <thread>
 #include <utility>
 
-#include "lumora-local/metrics.h"
 #include "lumora-local/socket_protocol.h"
 
 namespace pinwell::lumora {

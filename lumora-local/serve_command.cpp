@@ -8,18 +8,18 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <initializer_list>
 #include <mutex>
 
 #include "foundation/format.h"
 #include "lumora-local/admin_listener.h"
-#include "lumora-local/certificate_dates.h"
+#include "lumora-local/certificate_file.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/key_file.h"
 #include "lumora-local/lookup.h"
 #include "lumora-local/metrics.h"
-#include "lumora-local/metrics_listener.h"
 #include "lumora-local/server.h"
 #include "lumora-local/service_manager.h"
 #include "lumora-local/store_opening.h"
@@ -139,6 +139,24 @@ void takeSignals(int descriptor) {
 TlsFiles tlsFilesOf(const ServiceDirectory& directory) {
     return {directory.serverCertificatePath(), directory.serverKeyPath(),
             directory.settings().passphraseFile};
+}
+
+/// When the certificates of the server and of the ticket signer's chain expire. A file that cannot be read is
+/// left out.
+std::vector<CertificateDate> certificateDates(const ServiceDirectory& directory) {
+    std::vector<CertificateDate> dates;
+    const auto add = [&](const char* role, const std::string& path) {
+        try {
+            dates.push_back({role, foundation::Date{expiryOf(readCertificateFile(path).get())}});
+        } catch (const Failure&) {
+            // A service for lookups has no signer; another file may have become unreadable.
+        }
+    };
+    add("server", directory.serverCertificatePath());
+    constexpr std::array kRoles{"signer", "intermediate", "root"};
+    const std::vector<std::string>& chain = directory.signerChainPaths();
+    for (std::size_t i = 0; i < chain.size() && i < kRoles.size(); ++i) add(kRoles.at(i), chain[i]);
+    return dates;
 }
 
 /// The sources of the metrics. Its functions may be called from any thread.

@@ -1,0 +1,27 @@
+// The parts that this build leaves out. Their commands and options are there, and say so.
+#include "foundation/format.h"
+#include "lumora-local/failure.h"
+#include "lumora-local/metrics.h"
+#include "lumora-local/token_key.h"
+
+namespace pinwell::lumora {
+
+#if PINWELL_WITHOUT_METRICS
+void requireMetrics() {
+    throw Failure(EX_CONFIG, "cannot offer metrics: this program was built without them");
+}
+
+std::string describeMetrics(const ServiceCounts::Snapshot&, const ServiceFacts&) {
+    requireMetrics();
+    return {};
+}
+#endif
+
+#if PINWELL_WITHOUT_PKCS11
+std::unique_ptr<DigestSigner> openTokenKey(const std::string& uri) {
+    throw Failure(EX_CONFIG, foundation::format("cannot use %@: this program was built without PKCS #11",
+                                                uri.substr(0, uri.find('?'))));
+}
+#endif
+
+}  // namespace pinwell::lumora
