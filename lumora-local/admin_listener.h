@@ -10,7 +10,7 @@
 #include <thread>
 
 #include "lumora-local/admin_routes.h"
-#include "lumora-local/listener.h"
+#include "lumora-local/endpoint.h"
 #include "lumora-local/serve_command.h"
 #include "lumora-local/server.h"
 #include "sandbox/sandbox.h"

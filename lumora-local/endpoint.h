@@ -1,10 +1,13 @@
-// Hosts and ports as people and platform.json write them: "localhost", "localhost:8443", "[::1]:8443".
+// Hosts and ports as people and platform.json write them: "localhost", "localhost:8443", "[::1]:8443"; and a
+// socket that listens at one.
 #pragma once
 
 #include <cstdint>
 #include <optional>
 #include <string>
 #include <string_view>
+
+#include "foundation/file_io.h"
 
 namespace pinwell::lumora {
 
@@ -43,5 +46,29 @@ std::optional<Endpoint> parseEndpoint(std::string_view text, std::uint16_t defau
 
 /// "HOST:PORT", an IPv6 address in brackets.
 std::string toString(const Endpoint& endpoint);
+
+/// A listening TCP socket. One thread at a time.
+class Listener {
+  public:
+    /// Binds and listens; port 0 lets the system choose one. A name is resolved, and its first usable address
+    /// is taken. Throws Failure (EX_UNAVAILABLE), which names the address.
+    explicit Listener(const Endpoint& endpoint);
+
+    /// The requested host, with the bound port.
+    const Endpoint& endpoint() const noexcept { return endpoint_; }
+
+    bool isIPv6() const noexcept { return isIPv6_; }
+
+    /// Non-blocking; the listener keeps it until release().
+    int descriptor() const noexcept { return socket_.get(); }
+
+    /// Hands the socket to the caller.
+    foundation::FileDescriptor release() noexcept { return std::move(socket_); }
+
+  private:
+    Endpoint endpoint_;
+    foundation::FileDescriptor socket_;
+    bool isIPv6_ = false;
+};
 
 }  // namespace pinwell::lumora

@@ -15,7 +15,7 @@
 #include <vector>
 
 #include "foundation/date.h"
-#include "lumora-local/listener.h"
+#include "lumora-local/endpoint.h"
 #include "lumora-local/record_store.h"
 #include "lumora-local/service_counts.h"
 

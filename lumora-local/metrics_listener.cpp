@@ -16,8 +16,6 @@
 #include <thread>
 #include <utility>
 
-#include "lumora-local/socket_protocol.h"
-
 namespace pinwell::lumora {
 namespace {
 
@@ -112,8 +110,7 @@ class MetricsListener::Loop {
   public:
     Loop(Listener& listener, std::function<std::string()> text)
         : text_(std::move(text)), acceptor_(context_), pause_(context_) {
-        const Tcp protocol = protocolOf(listener.descriptor());
-        acceptor_.assign(protocol, listener.release().release());
+        acceptor_.assign(listener.isIPv6() ? Tcp::v6() : Tcp::v4(), listener.release().release());
         acceptor_.non_blocking(true);
         accept();
         thread_ = std::thread([this] { run(); });

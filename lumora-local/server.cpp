@@ -14,7 +14,6 @@
 
 #include "foundation/format.h"
 #include "lumora-local/connection.h"
-#include "lumora-local/socket_protocol.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -41,8 +40,7 @@ class Acceptor {
           pause_(strand_),
           shared_(shared),
           free_(shared.limits.connections) {
-        const Tcp protocol = protocolOf(listener.descriptor());
-        acceptor_.assign(protocol, listener.release().release());
+        acceptor_.assign(listener.isIPv6() ? Tcp::v6() : Tcp::v4(), listener.release().release());
         acceptor_.non_blocking(true);
     }
 

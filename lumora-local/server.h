@@ -7,8 +7,8 @@
 #include <vector>
 
 #include "lumora-local/access_log.h"
+#include "lumora-local/endpoint.h"
 #include "lumora-local/http_service.h"
-#include "lumora-local/listener.h"
 #include "lumora-local/service_counts.h"
 #include "lumora-local/tls_context.h"
 
