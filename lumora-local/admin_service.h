@@ -12,7 +12,6 @@
 
 #include "lumora-local/access_list.h"
 #include "lumora-local/http_service.h"
-#include "lumora-local/query.h"
 #include "lumora-local/refusal_log.h"
 #include "lumora-local/token_buckets.h"
 

@@ -21,11 +21,30 @@
 #include "foundation/bytes.h"
 #include "lumora-local/client_certificate.h"
 #include "lumora-local/connection_table.h"
-#include "lumora-local/http_rules.h"
+#include "lumora-local/http_service.h"
 #include "lumora-local/server.h"
 #include "lumora-local/tls_stream.h"
 
 namespace pinwell::lumora {
+
+/// The service's rules for requests beyond the parser's checks (http_rules.cpp). Refusals are a status: 400,
+/// 408, 411, 413, 414 or 431.
+using HttpRequest = boost::beast::http::request<boost::beast::http::string_body>;
+
+/// Whether a body follows the head.
+bool announcesBody(const HttpRequest& request);
+
+/// Whether the client waits for an interim response before it sends the body (RFC 9110, 10.1.1).
+bool expectsContinue(const HttpRequest& request);
+
+/// Refuses heads before any handler: an unknown method, a target that is too long, framing that two sides may
+/// read differently (RFC 9112, 6.3), no host or two hosts.
+std::optional<int> refuseHead(const HttpRequest& request);
+
+/// Refuses a request that must have a body and does not state its end.
+std::optional<int> refuseMissingLength(const HttpRequest& request);
+
+RequestHead headOf(const HttpRequest& request);
 
 /// The shared state of all connections of a server. Outlives them all.
 struct ConnectionContext {

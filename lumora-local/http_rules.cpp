@@ -1,7 +1,7 @@
-#include "lumora-local/http_rules.h"
-
 #include <algorithm>
 #include <boost/beast/core/string.hpp>
+
+#include "lumora-local/connection.h"
 
 namespace pinwell::lumora {
 namespace {

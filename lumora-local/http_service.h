@@ -1,6 +1,7 @@
-// The handling of HTTP requests, without sockets.
+// The handling of HTTP requests, without sockets: heads, targets with their queries, and responses.
 #pragma once
 
+#include <map>
 #include <memory>
 #include <optional>
 #include <string>
@@ -52,7 +53,7 @@ class HttpService {
     /// The response to a request whose head was accepted.
     virtual Answer answerBody(const RequestHead& head, std::string_view body) const = 0;
 
-    /// The refusal of a request that breaks the rules of HTTP (http_rules.h). `head` is null if it was not
+    /// The refusal of a request that breaks the rules of HTTP (http_rules.cpp). `head` is null if it was not
     /// read.
     virtual Answer refuse(int status, const RequestHead* head) const = 0;
 
@@ -68,5 +69,19 @@ std::string_view pathOf(std::string_view target);
 
 /// Whether this is the media type application/json. Case and parameters do not count (RFC 9110, 8.3.1).
 bool isJson(std::string_view contentType);
+
+/// Names and values, decoded: "%" and two hexadecimal digits is a byte, "+" is a space (as forms are sent).
+using Query = std::map<std::string, std::string, std::less<>>;
+
+/// The text after the first "?" of the target, up to a "#". `nullopt` if it is malformed: a name that is
+/// empty or occurs twice, a "%" without its digits, a byte 0, text that is not UTF-8.
+std::optional<Query> parseQuery(std::string_view target);
+
+/// Text in the form of a value, or of a segment of a path: every byte except letters, digits and "-._~" is
+/// encoded.
+std::string percentEncoded(std::string_view text);
+
+/// `nullopt` for a "%" without its digits.
+std::optional<std::string> percentDecoded(std::string_view text);
 
 }  // namespace pinwell::lumora

@@ -6,7 +6,7 @@
 
 #include "foundation/format.h"
 #include "foundation/markup.h"
-#include "lumora-local/query.h"
+#include "lumora-local/http_service.h"
 #include "lumora-local/rfc3339.h"
 
 namespace pinwell::lumora {

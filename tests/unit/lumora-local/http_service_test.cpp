@@ -1,4 +1,4 @@
-#include "lumora-local/query.h"
+#include "lumora-local/http_service.h"
 
 #include <gtest/gtest.h>
 
