@@ -19,10 +19,10 @@
 #include <string>
 
 #include "foundation/bytes.h"
-#include "lumora-local/client_certificate.h"
 #include "lumora-local/connection_table.h"
 #include "lumora-local/http_service.h"
 #include "lumora-local/server.h"
+#include "lumora-local/tls_context.h"
 #include "lumora-local/tls_stream.h"
 
 namespace pinwell::lumora {

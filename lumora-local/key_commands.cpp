@@ -9,11 +9,11 @@
 #include "foundation/value.h"
 #include "lumora-local/authority.h"
 #include "lumora-local/certificate_file.h"
-#include "lumora-local/client_certificate.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/key_file.h"
 #include "lumora-local/rfc3339.h"
+#include "lumora-local/tls_context.h"
 
 namespace pinwell::lumora {
 namespace {
