@@ -4,8 +4,8 @@
 #include "foundation/markup.h"
 #include "foundation/value.h"
 #include "lumora-local/admin_routes.h"
+#include "lumora-local/admin_service.h"
 #include "lumora-local/change_request.h"
-#include "lumora-local/problem.h"
 #include "lumora-local/sha256.h"
 
 namespace pinwell::lumora {

@@ -7,7 +7,7 @@
 #include "foundation/markup.h"
 #include "foundation/value.h"
 #include "lumora-local/admin_routes.h"
-#include "lumora-local/problem.h"
+#include "lumora-local/admin_service.h"
 #include "lumora-local/record_name.h"
 #include "lumora-local/rfc3339.h"
 

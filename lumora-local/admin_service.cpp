@@ -1,15 +1,120 @@
 #include "lumora-local/admin_service.h"
 
 #include <algorithm>
+#include <exception>
+#include <utility>
 
 #include "foundation/format.h"
+#include "foundation/json.h"
+#include "foundation/markup.h"
+#include "foundation/value.h"
 #include "lumora-local/change_request.h"
-#include "lumora-local/problem.h"
 
 namespace pinwell::lumora {
 namespace {
 
+using foundation::Dictionary;
 using foundation::format;
+
+}  // namespace
+
+std::string_view titleOf(int status) {
+    switch (status) {
+        case 400:
+            return "Bad Request";
+        case 403:
+            return "Forbidden";
+        case 404:
+            return "Not Found";
+        case 405:
+            return "Method Not Allowed";
+        case 408:
+            return "Request Timeout";
+        case 409:
+            return "Conflict";
+        case 411:
+            return "Length Required";
+        case 413:
+            return "Content Too Large";
+        case 414:
+            return "URI Too Long";
+        case 415:
+            return "Unsupported Media Type";
+        case 422:
+            return "Unprocessable Content";
+        case 429:
+            return "Too Many Requests";
+        case 431:
+            return "Request Header Fields Too Large";
+        case 503:
+            return "Service Unavailable";
+        default:
+            return "Internal Server Error";
+    }
+}
+
+Answer problem(int status, std::string_view detail) {
+    Answer answer;
+    answer.status = status;
+    answer.contentType = "application/problem+json";
+    // The detail may repeat the client's text: without control characters, and in UTF-8.
+    const auto document =
+        foundation::serializeJSON(Dictionary{{"type", "about:blank"},
+                                             {"title", titleOf(status)},
+                                             {"status", status},
+                                             {"detail", foundation::escapeForDisplay(detail)}});
+    answer.body = document ? foundation::toString(*document) : std::string("{}");
+    return answer;
+}
+
+Answer problemForNow(int status, std::string_view detail, std::int64_t seconds) {
+    Answer answer = problem(status, detail);
+    answer.headers.emplace_back("Retry-After", std::to_string(seconds));
+    return answer;
+}
+
+namespace {
+
+constexpr TokenBuckets::Allowance kPerClient{20, std::chrono::minutes(1)};
+constexpr TokenBuckets::Allowance kOverall{100, std::chrono::seconds(10)};
+constexpr std::size_t kClients = 1024;
+
+}  // namespace
+
+RefusalLog::RefusalLog(RecordStore& store, ErrorLog errorLog, TokenBuckets::Now now)
+    : store_(store),
+      errorLog_(std::move(errorLog)),
+      perClient_(kPerClient, kClients, now),
+      overall_(kOverall, 1, std::move(now)) {}
+
+void RefusalLog::note(const std::string& client, const RefusedAttempt& attempt,
+                      const std::string& why) noexcept {
+    try {
+        std::uint64_t leftOut = 0;
+        {
+            const std::lock_guard lock(mutex_);
+            if (perClient_.take(client) || overall_.take("")) {
+                ++leftOut_;
+                return;
+            }
+            leftOut = std::exchange(leftOut_, 0);
+        }
+        Occasion occasion{foundation::Date::now(), client, std::nullopt, why, false};
+        if (leftOut > 0) {
+            occasion.comment += format(" (%llu more attempts before it are not in the log)",
+                                       static_cast<unsigned long long>(leftOut));
+        }
+        store_.noteRefusal(attempt, occasion);
+    } catch (const std::exception& error) {
+        try {
+            errorLog_(format("cannot note a refused attempt of %@: %s", client, error.what()));
+        } catch (const std::exception&) {
+            return;  // there is no one left to report to
+        }
+    }
+}
+
+namespace {
 
 constexpr std::int64_t kRetryAfter = 1;
 

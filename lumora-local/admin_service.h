@@ -1,21 +1,70 @@
-// Requests of clients with a certificate: rights, rates and paths.
+// Requests of clients with a certificate: rights, rates, paths and refusals.
 //
 // The paths are in a table. Each row has the method, the path, the client's required right, the allowed names
 // in a query, and a handler. docs/service/openapi.json describes the requests of /v1.
+//
+// Refusals have the form application/problem+json (RFC 9457). Refused attempts to issue and revoke are events
+// of the log too. Events are kept for ever, so their number is bounded: each client may cause twenty at once
+// and one a minute, all clients together a hundred at once and one every ten seconds. Further refusals are
+// counted, and the next event's comment has their number. The access log has a line for every request.
 #pragma once
 
+#include <cstdint>
 #include <functional>
+#include <mutex>
 #include <optional>
+#include <stdexcept>
 #include <string>
 #include <string_view>
 #include <vector>
 
+#include "foundation/date.h"
 #include "lumora-local/access_list.h"
 #include "lumora-local/http_service.h"
-#include "lumora-local/refusal_log.h"
+#include "lumora-local/record_store.h"
 #include "lumora-local/token_buckets.h"
 
 namespace pinwell::lumora {
+
+/// {"type": "about:blank", "title": the status in words, "status", "detail"}. `detail` is UTF-8 text.
+Answer problem(int status, std::string_view detail);
+
+/// The same with Retry-After.
+Answer problemForNow(int status, std::string_view detail, std::int64_t seconds);
+
+/// Leaves the work on a request that is refused. The text is the detail.
+class Refused : public std::runtime_error {
+  public:
+    Refused(int status, const std::string& detail) : std::runtime_error(detail), status_(status) {}
+
+    int status() const noexcept { return status_; }
+
+  private:
+    int status_;
+};
+
+/// A status in words, as RFC 9110 and RFC 6585 name it.
+std::string_view titleOf(int status);
+
+/// Writes the events of refused attempts. For any thread.
+class RefusalLog {
+  public:
+    using ErrorLog = std::function<void(std::string_view)>;
+
+    /// `store` must outlive it. `errorLog` hears of events that cannot be written.
+    RefusalLog(RecordStore& store, ErrorLog errorLog, TokenBuckets::Now now = TokenBuckets::Clock::now);
+
+    /// Never throws: the request is refused even if the refusal cannot be logged.
+    void note(const std::string& client, const RefusedAttempt& attempt, const std::string& why) noexcept;
+
+  private:
+    RecordStore& store_;
+    const ErrorLog errorLog_;
+    TokenBuckets perClient_;
+    TokenBuckets overall_;
+    std::mutex mutex_;
+    std::uint64_t leftOut_ = 0;
+};
 
 /// A handler's input. All of it lives until the handler returns.
 struct AdminRequest {

@@ -7,7 +7,7 @@
 #include "foundation/json.h"
 #include "foundation/utf8.h"
 #include "foundation/value.h"
-#include "lumora-local/problem.h"
+#include "lumora-local/admin_service.h"
 
 namespace pinwell::lumora {
 namespace {

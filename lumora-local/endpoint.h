@@ -59,10 +59,7 @@ class Listener {
 
     bool isIPv6() const noexcept { return isIPv6_; }
 
-    /// Non-blocking; the listener keeps it until release().
-    int descriptor() const noexcept { return socket_.get(); }
-
-    /// Hands the socket to the caller.
+    /// Hands the socket to the caller. It is non-blocking.
     foundation::FileDescriptor release() noexcept { return std::move(socket_); }
 
   private:

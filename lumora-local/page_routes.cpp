@@ -4,8 +4,8 @@
 
 #include "foundation/format.h"
 #include "lumora-local/admin_routes.h"
+#include "lumora-local/admin_service.h"
 #include "lumora-local/page.h"
-#include "lumora-local/problem.h"
 #include "lumora-local/record_name.h"
 
 namespace pinwell::lumora {

@@ -8,7 +8,6 @@
 #include "foundation/json.h"
 #include "foundation/value.h"
 #include "lumora-local/admin_routes.h"
-#include "lumora-local/problem.h"
 #include "lumora-local/sqlite_store.h"
 #include "support/temporary_directory.h"
 

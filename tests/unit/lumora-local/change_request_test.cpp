@@ -2,7 +2,7 @@
 
 #include <gtest/gtest.h>
 
-#include "lumora-local/problem.h"
+#include "lumora-local/admin_service.h"
 
 namespace pinwell::lumora {
 namespace {
