@@ -7,8 +7,8 @@
 #include <utility>
 
 #include "foundation/format.h"
+#include "lumora-local/admin_routes.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/page_routes.h"
 #include "lumora-local/store_opening.h"
 
 namespace pinwell::lumora {

@@ -8,7 +8,7 @@
 #include "foundation/json.h"
 #include "foundation/markup.h"
 #include "foundation/value.h"
-#include "lumora-local/change_request.h"
+#include "lumora-local/admin_routes.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -1,9 +1,8 @@
-#include "lumora-local/page_routes.h"
+#include "lumora-local/admin_routes.h"
 
 #include <utility>
 
 #include "foundation/format.h"
-#include "lumora-local/admin_routes.h"
 #include "lumora-local/admin_service.h"
 #include "lumora-local/page.h"
 #include "lumora-local/record_name.h"

@@ -8,8 +8,8 @@
 #include <array>
 #include <cmath>
 
+#include "lumora-local/admin_routes.h"
 #include "lumora-local/admin_service.h"
-#include "lumora-local/page_routes.h"
 #include "lumora-local/sqlite_store.h"
 #include "sample_record.h"
 #include "support/temporary_directory.h"

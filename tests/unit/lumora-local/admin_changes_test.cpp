@@ -1,4 +1,4 @@
-#include "lumora-local/change_request.h"
+#include "lumora-local/admin_routes.h"
 
 #include <gtest/gtest.h>
 
