@@ -1,8 +1,8 @@
 // The page for people: the records, their states and their histories. Read only.
 //
 // Every function returns a whole document. It needs no script and loads only /style.css; the policy in its
-// headers (page_routes.h) allows nothing else. Text from the store is escaped, and has no control characters
-// and no marks that change the direction of writing.
+// headers (page_routes.cpp) allows nothing else. Text from the store is escaped, and has no control
+// characters and no marks that change the direction of writing.
 #pragma once
 
 #include <optional>
