@@ -19,8 +19,6 @@
 
 #include "foundation/format.h"
 #include "lumora-local/ad_hoc_signature.h"
-#include "lumora-local/property_list_document.h"
-#include "lumora-local/resource_seal.h"
 #include "lumora-local/sample_bundle.h"
 #include "support/archive_builder.h"
 #include "support/disk_image_builder.h"

@@ -4,7 +4,11 @@
 #include <array>
 #include <utility>
 
+#include "formats/superblob_layout.h"
 #include "foundation/byte_writer.h"
+#include "foundation/format.h"
+#include "foundation/property_list.h"
+#include "lumora-local/failure.h"
 #include "lumora-local/sha256.h"
 
 namespace pinwell::lumora {
@@ -13,11 +17,20 @@ namespace {
 using foundation::ByteView;
 using foundation::ByteWriter;
 using foundation::Data;
+using foundation::Dictionary;
 
-constexpr std::uint32_t kSuperBlobMagic = 0xFADE0CC0;
+}  // namespace
+
+foundation::Data propertyListDocument(const foundation::Dictionary& dictionary) {
+    foundation::Result<foundation::Data> document = foundation::serializePropertyList(dictionary);
+    if (!document) throw Failure(EX_SOFTWARE, document.error().localizedDescription());
+    return *std::move(document);
+}
+
+namespace {
+
 constexpr std::uint32_t kCodeDirectoryMagic = 0xFADE0C02;
 constexpr std::uint32_t kRequirementsMagic = 0xFADE0C01;
-constexpr std::uint32_t kCmsMagic = 0xFADE0B01;
 constexpr std::uint32_t kCodeDirectorySlot = 0;
 constexpr std::uint32_t kRequirementsSlot = 2;
 constexpr std::uint32_t kCmsSlot = 0x10000;
@@ -35,11 +48,11 @@ std::uint32_t narrow(std::size_t size) {
 }
 
 Data requirementsBlob() {
-    return ByteWriter().be32(kRequirementsMagic).be32(12).be32(0).data();
+    return ByteWriter().be32(kRequirementsMagic).be32(kBlobHeaderSize + 4).be32(0).data();
 }
 
 Data cmsBlob() {
-    return ByteWriter().be32(kCmsMagic).be32(8).data();
+    return ByteWriter().be32(kWrapperMagic).be32(kBlobHeaderSize).data();
 }
 
 }  // namespace
@@ -101,18 +114,73 @@ Data AdHocSignature::superblob() const {
     }};
     ByteWriter index;
     ByteWriter contents;
-    const std::size_t start = 12 + 8 * blobs.size();
+    const std::size_t start = kSuperblobHeaderSize + kBlobIndexEntrySize * blobs.size();
     for (const auto& [slot, blob] : blobs) {
         index.be32(slot).be32(narrow(start + contents.size()));
         contents.bytes(blob);
     }
     return ByteWriter()
-        .be32(kSuperBlobMagic)
+        .be32(kSuperblobMagic)
         .be32(narrow(start + contents.size()))
         .be32(narrow(blobs.size()))
         .bytes(index.data())
         .bytes(contents.data())
         .data();
+}
+
+namespace {
+
+Dictionary ruleOf(double weight, const char* flag = nullptr) {
+    Dictionary rule{{"weight", weight}};
+    if (flag != nullptr) rule.emplace(flag, true);
+    return rule;
+}
+
+/// Everything is sealed, and nested code as code. Exceptions: the property list, which has its own slot, and
+/// files of the desktop.
+Dictionary rules2() {
+    return {
+        {"^.*", true},
+        {"^[^/]+$", ruleOf(10, "nested")},
+        {"^(Frameworks|Programs)/", ruleOf(10, "nested")},
+        {"^Info\\.plist$", ruleOf(20, "omit")},
+        {"^Resources/", ruleOf(20)},
+        {"^Resources/.*\\.lproj/", ruleOf(1000, "optional")},
+        {"^(.*/)?\\.DS_Store$", ruleOf(2000, "omit")},
+    };
+}
+
+Dictionary rules() {
+    return {{"^Resources/", true}, {"^Resources/.*\\.lproj/", ruleOf(1000, "optional")}};
+}
+
+}  // namespace
+
+void ResourceSeal::addFile(const std::string& path, ByteView contents) {
+    if (path.starts_with("Resources/")) files_[path] = sha1(contents);
+    files2_[path] = Dictionary{{"hash", sha1(contents)}, {"hash2", sha256(contents)}};
+}
+
+void ResourceSeal::addOptionalFile(const std::string& path, ByteView contents) {
+    files_[path] = Dictionary{{"hash", sha1(contents)}, {"optional", true}};
+    files2_[path] = Dictionary{{"hash", sha1(contents)}, {"hash2", sha256(contents)}, {"optional", true}};
+}
+
+void ResourceSeal::addLink(const std::string& path, const std::string& target) {
+    files2_[path] = Dictionary{{"symlink", target}};
+}
+
+void ResourceSeal::addNestedCode(const std::string& path, const std::vector<Data>& codeHashes) {
+    std::string requirement;
+    for (const Data& hash : codeHashes)
+        requirement += foundation::format("%@cdhash H\"%@\"", requirement.empty() ? "" : " or ",
+                                          foundation::toHex(hash));
+    files2_[path] = Dictionary{{"cdhash", codeHashes.front()}, {"requirement", requirement}};
+}
+
+Data ResourceSeal::document() const {
+    return propertyListDocument(
+        {{"files", files_}, {"files2", files2_}, {"rules", rules()}, {"rules2", rules2()}});
 }
 
 }  // namespace pinwell::lumora

@@ -1,16 +1,27 @@
-// Ad-hoc code signatures, for the samples.
+// Signing ad hoc, for the samples: code signatures, the seal of a bundle's resources, and the property lists
+// of both.
 //
-// A superblob of three blobs: a SHA-256 code directory (version 0x20400, one hash per page of 4096 bytes), an
-// empty requirements blob, an empty CMS blob.
+// A code signature is a superblob (formats/superblob_layout.h) of three blobs: a SHA-256 code directory
+// (version 0x20400, one hash per page of 4096 bytes), an empty requirements blob, an empty CMS blob.
+//
+// A seal has the form of code signers: Contents/_CodeSignature/CodeResources. It is a property list of four
+// dictionaries: `files2` has the contents of each path, `rules2` determines the sealed paths. `files` and
+// `rules` are the same for readers that know only SHA-1 and plain files.
 #pragma once
 
 #include <cstdint>
 #include <map>
 #include <string>
+#include <string_view>
+#include <vector>
 
 #include "foundation/bytes.h"
+#include "foundation/value.h"
 
 namespace pinwell::lumora {
+
+/// A property list in XML. Throws Failure when it cannot be made.
+foundation::Data propertyListDocument(const foundation::Dictionary& dictionary);
 
 struct AdHocSignature {
     std::string identifier;
@@ -33,6 +44,27 @@ struct AdHocSignature {
 
   private:
     foundation::Data codeDirectory() const;
+};
+
+/// The seal of a bundle. Paths are relative to the directory that the seal's own directory is in.
+class ResourceSeal {
+  public:
+    void addFile(const std::string& path, foundation::ByteView contents);
+
+    /// A file that may be missing, such as localized resources.
+    void addOptionalFile(const std::string& path, foundation::ByteView contents);
+
+    void addLink(const std::string& path, const std::string& target);
+
+    /// Nested code, a file or a bundle: with any of these code hashes. Readers use the first
+    /// one.
+    void addNestedCode(const std::string& path, const std::vector<foundation::Data>& codeHashes);
+
+    foundation::Data document() const;
+
+  private:
+    foundation::Dictionary files_;
+    foundation::Dictionary files2_;
 };
 
 }  // namespace pinwell::lumora

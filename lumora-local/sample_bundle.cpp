@@ -7,8 +7,6 @@
 #include "foundation/value.h"
 #include "lumora-local/ad_hoc_signature.h"
 #include "lumora-local/file_writing.h"
-#include "lumora-local/property_list_document.h"
-#include "lumora-local/resource_seal.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -8,7 +8,6 @@
 #include "lumora-local/ad_hoc_signature.h"
 #include "lumora-local/deflate.h"
 #include "lumora-local/file_writing.h"
-#include "lumora-local/property_list_document.h"
 #include "lumora-local/sample_volume.h"
 
 namespace pinwell::lumora {
