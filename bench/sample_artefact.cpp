@@ -19,7 +19,7 @@
 
 #include "foundation/format.h"
 #include "lumora-local/ad_hoc_signature.h"
-#include "lumora-local/sample_bundle.h"
+#include "lumora-local/samples.h"
 #include "support/archive_builder.h"
 #include "support/disk_image_builder.h"
 #include "support/temporary_directory.h"

@@ -1,5 +1,13 @@
-#include "lumora-local/sample_bundle.h"
-
+// A small signed application to try the service with. In Sample.app/Contents:
+//
+//   Info.plist
+//   Programs/Sample                 the executable; any one directory in Contents would do
+//   Programs/sample-tool            a nested program
+//   Frameworks/Greeting.framework   a nested framework of one version, with links, a seal and resources
+//   Resources/                      ReadMe.txt; Latest.txt, a link to it; en.lproj/Greeting.txt (optional)
+//   _CodeSignature/CodeResources    the seal of all these (ad_hoc_signature.h)
+//
+// The executables are universal images of two slices, each signed ad hoc (ad_hoc_signature.h).
 #include <map>
 
 #include "foundation/byte_writer.h"
@@ -7,6 +15,7 @@
 #include "foundation/value.h"
 #include "lumora-local/ad_hoc_signature.h"
 #include "lumora-local/file_writing.h"
+#include "lumora-local/samples.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -1,5 +1,14 @@
-#include "lumora-local/sample_package.h"
-
+// A signed flat package to try the service with, which other readers of xar archives accept too.
+//
+// | Part              | Holds                                                                         |
+// |-------------------|-------------------------------------------------------------------------------|
+// | header            | 28 bytes: "xar!", size, version 1, lengths of the table, checksum algorithm 1 |
+// | table of contents | XML in a zlib stream: the checksum's place, the signature's place and its     |
+// |                   | certificates, the files                                                       |
+// | heap              | SHA-1 of the stream; CMS SignedData, detached over that; the files' data      |
+//
+// The files are PackageInfo, compressed, and ReadMe.txt, uncompressed. The signer's key and certificates (RSA
+// 2048; a root and a leaf) are made new and not kept, so no two packages are the same.
 #include <openssl/cms.h>
 
 #include <cstdint>
@@ -9,8 +18,8 @@
 #include "foundation/base64.h"
 #include "foundation/byte_writer.h"
 #include "lumora-local/certificate_maker.h"
-#include "lumora-local/deflate.h"
 #include "lumora-local/file_writing.h"
+#include "lumora-local/samples.h"
 #include "lumora-local/sha256.h"
 
 namespace pinwell::lumora {

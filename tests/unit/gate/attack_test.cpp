@@ -7,7 +7,7 @@
 
 #include "codesign/byte_source.h"
 #include "gate_fixture.h"
-#include "lumora-local/sample_bundle.h"
+#include "lumora-local/samples.h"
 #include "support/archive_builder.h"
 #include "support/executable_image_builder.h"
 #include "verify/code.h"

@@ -5,7 +5,7 @@
 
 #include "gate/run.h"
 #include "gate_fixture.h"
-#include "lumora-local/sample_disk_image.h"
+#include "lumora-local/samples.h"
 #include "verify/check.h"
 
 namespace pinwell::test {

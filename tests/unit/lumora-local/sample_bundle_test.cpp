@@ -1,4 +1,4 @@
-#include "lumora-local/sample_bundle.h"
+#include "lumora-local/samples.h"
 
 #include <gtest/gtest.h>
 #include <sys/stat.h>

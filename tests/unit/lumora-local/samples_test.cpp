@@ -7,9 +7,6 @@
 #include "fixed_now.h"
 #include "foundation/byte_reader.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/sample_disk_image.h"
-#include "lumora-local/sample_package.h"
-#include "lumora-local/sample_volume.h"
 #include "lumora-local/sha256.h"
 #include "support/temporary_directory.h"
 
