@@ -1,7 +1,7 @@
 #include "lumora-local/postgres_search.h"
 
 #include "lumora-local/postgres_rows.h"
-#include "lumora-local/search_page.h"
+#include "lumora-local/store_rules.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -1,4 +1,5 @@
 #include "lumora-local/postgres_store.h"
+#include "lumora-local/store_rules.h"
 
 #include <algorithm>
 #include <chrono>

@@ -283,31 +283,4 @@ class RecordStore : public RecordSource {
     virtual void holdStill(const std::function<void(const std::function<void()>& confirm)>& work) = 0;
 };
 
-/// A revoked record that a valid ticket for another one would get around.
-struct RevokedElsewhere {
-    Environment environment = Environment::production;
-    std::string name;
-};
-
-/// The state of the store before a put.
-struct Standing {
-    std::optional<bool> revoked;                // of the record of that name; `nullopt` if there is none
-    std::optional<RevokedElsewhere> elsewhere;  // only for a valid ticket
-};
-
-/// The action of putting `record`. Throws RevokedFailure if it would make revoked software valid and the
-/// occasion does not reinstate.
-Action actionOf(Environment environment, const Record& record, const Standing& before,
-                const Occasion& occasion);
-
-/// Adds the hashes of a record's earlier tickets, behind its own. Throws TooManyHashesFailure as put() does.
-void keepEarlierHashes(Record& record, const std::vector<CodeHash>& earlier);
-
-/// The event for a put, with its hash.
-Event makeEvent(Environment environment, const SignedRecord& entry, Action action, const Occasion& occasion,
-                std::string previous);
-
-/// The event for a refused attempt, with its hash.
-Event makeEvent(const RefusedAttempt& attempt, const Occasion& occasion, std::string previous);
-
 }  // namespace pinwell::lumora

@@ -4,8 +4,8 @@
 
 #include <limits>
 
-#include "lumora-local/search_page.h"
 #include "lumora-local/sqlite_rows.h"
+#include "lumora-local/store_rules.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -1,4 +1,5 @@
 #include "lumora-local/sqlite_store.h"
+#include "lumora-local/store_rules.h"
 
 #include <SQLiteCpp/SQLiteCpp.h>
 

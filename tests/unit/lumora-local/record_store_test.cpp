@@ -10,6 +10,7 @@
 #include "lumora-local/failure.h"
 #include "lumora-local/history.h"
 #include "lumora-local/sha256.h"
+#include "lumora-local/store_rules.h"
 #include "sample_record.h"
 #include "store_kinds.h"
 

@@ -1,11 +1,40 @@
-// Shared code of the searches of both stores.
+// The rules that both stores share: whether a put is allowed, the events it makes, and the pages of a search.
 #pragma once
 
+#include <optional>
 #include <string>
+#include <vector>
 
 #include "lumora-local/record_store.h"
 
 namespace pinwell::lumora {
+
+/// A revoked record that a valid ticket for another one would get around.
+struct RevokedElsewhere {
+    Environment environment = Environment::production;
+    std::string name;
+};
+
+/// The state of the store before a put.
+struct Standing {
+    std::optional<bool> revoked;                // of the record of that name; `nullopt` if there is none
+    std::optional<RevokedElsewhere> elsewhere;  // only for a valid ticket
+};
+
+/// The action of putting `record`. Throws RevokedFailure if it would make revoked software valid and the
+/// occasion does not reinstate.
+Action actionOf(Environment environment, const Record& record, const Standing& before,
+                const Occasion& occasion);
+
+/// Adds the hashes of a record's earlier tickets, behind its own. Throws TooManyHashesFailure as put() does.
+void keepEarlierHashes(Record& record, const std::vector<CodeHash>& earlier);
+
+/// The event for a put, with its hash.
+Event makeEvent(Environment environment, const SignedRecord& entry, Action action, const Occasion& occasion,
+                std::string previous);
+
+/// The event for a refused attempt, with its hash.
+Event makeEvent(const RefusedAttempt& attempt, const Occasion& occasion, std::string previous);
 
 /// The number of one record's events that a search with `since` reads for one page.
 inline constexpr std::size_t kEventsReadForAPage = 1000;
