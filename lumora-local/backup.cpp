@@ -17,9 +17,8 @@
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/history.h"
-#include "lumora-local/sqlite_rows.h"
-#include "lumora-local/sqlite_schema.h"
 #include "lumora-local/sqlite_store.h"
+#include "lumora-local/sqlite_tables.h"
 
 namespace pinwell::lumora {
 namespace {

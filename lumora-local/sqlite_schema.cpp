@@ -1,5 +1,3 @@
-#include "lumora-local/sqlite_schema.h"
-
 #include <SQLiteCpp/SQLiteCpp.h>
 
 #include <filesystem>
@@ -11,7 +9,7 @@
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/sha256.h"
-#include "lumora-local/sqlite_rows.h"
+#include "lumora-local/sqlite_tables.h"
 
 namespace pinwell::lumora {
 namespace {

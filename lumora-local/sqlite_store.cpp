@@ -12,9 +12,7 @@
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/sha256.h"
-#include "lumora-local/sqlite_rows.h"
-#include "lumora-local/sqlite_schema.h"
-#include "lumora-local/sqlite_search.h"
+#include "lumora-local/sqlite_tables.h"
 
 namespace pinwell::lumora {
 namespace {

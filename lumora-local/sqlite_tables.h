@@ -1,4 +1,6 @@
-// Rows of the SQLite tables, in and out. Each function runs within the caller's transaction.
+// The tables of a record store in SQLite: their versions, their rows, and searches of them. For the store and
+// the backup. Each function about rows runs within the caller's transaction, each search within the caller's
+// lock.
 #pragma once
 
 #include <optional>
@@ -12,6 +14,19 @@ class Statement;
 }  // namespace SQLite
 
 namespace pinwell::lumora {
+
+/// The time that a writer waits for another process's write.
+inline constexpr int kBusyTimeoutMilliseconds = 10'000;
+
+/// Settings that every connection needs.
+void configureSqlite(SQLite::Database& database);
+
+/// Makes the tables of the current version, in one transaction.
+void createSqliteSchema(SQLite::Database& database);
+
+/// Brings the database at `path` to the current version, if it has an earlier one: one transaction, and a
+/// copy of the earlier database beside it. Throws Failure (EX_DATAERR) for a version that is not known.
+void upgradeSqliteSchema(SQLite::Database& database, const std::string& path);
 
 /// The exit status for a failure of the library, by its code, extended or not.
 int exitStatusOfSqlite(int code) noexcept;
@@ -36,5 +51,9 @@ void keepRequest(SQLite::Database& database, const Occasion& occasion, const Eve
 
 /// hashBeforeTheFirstEvent() if there is none.
 std::string lastEventHash(SQLite::Database& database);
+
+/// Searches, a page at a time.
+RecordPage searchRecords(SQLite::Database& database, const RecordSearch& search);
+EventPage searchEvents(SQLite::Database& database, const EventSearch& search);
 
 }  // namespace pinwell::lumora
