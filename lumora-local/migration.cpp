@@ -6,7 +6,7 @@
 #include "lumora-local/sha256.h"
 #include "lumora-local/store_opening.h"
 #if PINWELL_LUMORA_POSTGRESQL
-#include "lumora-local/postgres_needs.h"
+#include "lumora-local/postgres_pool.h"
 #include "lumora-local/postgres_store.h"
 #endif
 

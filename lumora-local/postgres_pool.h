@@ -1,4 +1,5 @@
-// A bounded set of connections to one database, shared by threads.
+// Connections to one database, shared by threads: a bounded set of them, and their needs beside the network,
+// by the URL and by the environment variables of libpq.
 #pragma once
 
 #include <condition_variable>
@@ -11,6 +12,18 @@
 
 namespace pinwell::lumora {
 
+struct PostgresNeeds {
+    bool tcp = false;                // some host is not a socket in the file system
+    std::vector<std::string> files;  // passwords, certificates, keys; not all of them need to exist
+};
+
+/// Throws Failure (EX_CONFIG) if the URL cannot be parsed; `named` is its source.
+PostgresNeeds postgresNeeds(const std::string& url, const std::string& named);
+
+/// The user if the URL names none: $PGUSER, or the caller's login name. Empty if unknown.
+std::string defaultPostgresUser();
+
+/// For any thread.
 class PostgresPool {
   public:
     /// A connection on loan. The destructor returns it, unless it has become unusable.

@@ -9,7 +9,7 @@
 #include "lumora-local/failure.h"
 #include "lumora-local/sqlite_store.h"
 #if PINWELL_LUMORA_POSTGRESQL
-#include "lumora-local/postgres_needs.h"
+#include "lumora-local/postgres_pool.h"
 #include "lumora-local/postgres_store.h"
 #endif
 

@@ -8,7 +8,7 @@
 #include "commit_cutter.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/history.h"
-#include "lumora-local/postgres_needs.h"
+#include "lumora-local/postgres_pool.h"
 #include "postgres_cluster.h"
 #include "sample_record.h"
 
