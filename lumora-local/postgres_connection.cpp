@@ -42,7 +42,23 @@ bool meansLost(std::string_view state) {
     return state.starts_with("08") || std::find(kStates.begin(), kStates.end(), state) != kStates.end();
 }
 
+int exitStatusFor(const PostgresError& error) {
+    const std::string& state = error.state();
+    if (error.lost() || state.starts_with("53") || state.starts_with("40") || state == "55P03" ||
+        state == "57014") {
+        return EX_TEMPFAIL;  // lost, out of a resource, blocked by another transaction, too slow
+    }
+    if (state == "42501") return EX_NOPERM;
+    if (state.starts_with("22") || state.starts_with("23")) return EX_DATAERR;
+    if (state.starts_with("42") || state.starts_with("3F")) return EX_CONFIG;
+    return EX_IOERR;
+}
+
 }  // namespace
+
+Failure asFailure(const PostgresError& error) {
+    return {exitStatusFor(error), foundation::format("record store: %@", std::string_view(error.what()))};
+}
 
 PostgresParameter PostgresParameter::bytes(ByteView bytes) {
     PostgresParameter parameter{std::nullopt};

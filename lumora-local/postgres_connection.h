@@ -16,6 +16,7 @@
 #include <vector>
 
 #include "foundation/bytes.h"
+#include "lumora-local/failure.h"
 
 struct pg_conn;
 struct pg_result;
@@ -40,6 +41,9 @@ class PostgresError : public std::runtime_error {
     std::string state_;
     bool lost_;
 };
+
+/// The failure of a command that meets `error`; its exit status follows from SQLSTATE.
+Failure asFailure(const PostgresError& error);
 
 /// A parameter of a statement: text, bytes (the type `bytea`), or NULL.
 class PostgresParameter {

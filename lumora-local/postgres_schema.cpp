@@ -1,7 +1,9 @@
-#include "lumora-local/postgres_schema.h"
-
 #include <array>
 #include <string>
+
+#include "foundation/format.h"
+#include "lumora-local/failure.h"
+#include "lumora-local/postgres_tables.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -107,6 +109,17 @@ void upgradePostgresSchema(PostgresConnection& connection, Deadline deadline) {
         connection.execute(kSteps.at(static_cast<std::size_t>(version)), deadline);
     }
     connection.execute("UPDATE lumora.store SET version = " + std::to_string(version), deadline);
+}
+
+void lockStore(PostgresConnection& connection, Deadline deadline) {
+    const PostgresRows rows = connection.query("SELECT version FROM store FOR UPDATE", {}, deadline);
+    const std::int64_t version = rows.size() == 1 ? rows.integer(0, 0) : 0;
+    if (version != kPostgresVersion) {
+        throw Failure(EX_CONFIG, foundation::format(
+                                     "the record store has become one of version %lld; this program knows "
+                                     "versions up to %d",
+                                     static_cast<long long>(version), kPostgresVersion));
+    }
 }
 
 }  // namespace pinwell::lumora

@@ -1,15 +1,11 @@
 #include "lumora-local/postgres_store.h"
-#include "lumora-local/store_rules.h"
 
 #include <algorithm>
 #include <chrono>
-#include <thread>
 
 #include "foundation/format.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/postgres_rows.h"
-#include "lumora-local/postgres_schema.h"
-#include "lumora-local/postgres_search.h"
+#include "lumora-local/postgres_tables.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -20,106 +16,14 @@ using std::chrono::milliseconds;
 using Clock = std::chrono::steady_clock;
 
 constexpr std::chrono::seconds kReadingTime{5};
-constexpr std::chrono::seconds kChangingTime{20};
 constexpr std::chrono::seconds kUpgradeTime{600};
 constexpr milliseconds kSilence{120'000};  // between two rows of a walk; the first may need sorting
-constexpr milliseconds kPauseBeforeTryingAgain{100};
 
-constexpr const char* kLockStore = "SELECT version FROM store FOR UPDATE";
-constexpr const char* kBeginChange = "BEGIN ISOLATION LEVEL READ COMMITTED READ WRITE";
 constexpr const char* kBeginWalk =
     "BEGIN ISOLATION LEVEL REPEATABLE READ READ ONLY; SET LOCAL statement_timeout = 0";
-constexpr const char* kLastEvent = "SELECT hash, position FROM event ORDER BY position DESC LIMIT 1";
-
-int exitStatusFor(const PostgresError& error) {
-    const std::string& state = error.state();
-    if (error.lost() || state.starts_with("53") || state.starts_with("40") || state == "55P03" ||
-        state == "57014") {
-        return EX_TEMPFAIL;  // lost, out of a resource, blocked by another transaction, too slow
-    }
-    if (state == "42501") return EX_NOPERM;
-    if (state.starts_with("22") || state.starts_with("23")) return EX_DATAERR;
-    if (state.starts_with("42") || state.starts_with("3F")) return EX_CONFIG;
-    return EX_IOERR;
-}
-
-Failure asFailure(const PostgresError& error) {
-    return {exitStatusFor(error), format("record store: %@", std::string_view(error.what()))};
-}
 
 Failure cannotUse(const PostgresPlace& place, std::string_view why) {
     return {EX_CONFIG, format("%@: %@", place.named, why)};
-}
-
-/// Locks the store until the end of the caller's transaction.
-void lockStore(PostgresConnection& connection, Deadline deadline) {
-    const PostgresRows rows = connection.query(kLockStore, {}, deadline);
-    const std::int64_t version = rows.size() == 1 ? rows.integer(0, 0) : 0;
-    if (version != kPostgresVersion) {
-        throw Failure(EX_CONFIG, format("the record store has become one of version %lld; this program knows "
-                                        "versions up to %d",
-                                        static_cast<long long>(version), kPostgresVersion));
-    }
-}
-
-struct Head {
-    std::string hash = hashBeforeTheFirstEvent();
-    std::int64_t position = 0;
-};
-
-Head lastEventOf(PostgresConnection& connection, Deadline deadline) {
-    const PostgresRows rows = connection.query(kLastEvent, {}, deadline);
-    if (rows.size() == 0) return {};
-    return {rows.text(0, 0), rows.integer(0, 1)};
-}
-
-std::optional<bool> isRevoked(PostgresConnection& connection, Environment environment,
-                              const std::string& name, Deadline deadline) {
-    const PostgresRows rows =
-        connection.query("SELECT revoked FROM record WHERE environment = $1 AND name = $2",
-                         {nameOf(environment), name}, deadline);
-    if (rows.size() == 0) return std::nullopt;
-    return rows.boolean(0, 0);
-}
-
-/// The same rule as in the SQLite store: a hash counts under any name and algorithm. The other hashes of a
-/// revoked artefact count if one of them is to get its own ticket.
-std::optional<RevokedElsewhere> revokedBeside(PostgresConnection& connection, Environment environment,
-                                              const Record& record, Deadline deadline) {
-    if (record.hashes.empty()) return std::nullopt;
-    PostgresArray hashes;
-    for (const CodeHash& hash : record.hashes) hashes.bytes(hash.hash);
-    const PostgresRows rows = connection.query(
-        "SELECT r.environment, r.name FROM hash h"
-        " JOIN record r ON r.environment = h.environment AND r.name = h.name"
-        " WHERE h.environment IN ($1, 'production') AND (r.environment <> $1 OR r.name <> $2)"
-        " AND r.revoked AND h.hash = ANY ($3::bytea[]) AND (h.hash = $4 OR h.position = 0)"
-        " ORDER BY r.name LIMIT 1",
-        {nameOf(environment), record.name, hashes.parameter(),
-         PostgresParameter::bytes(record.hashes.front().hash)},
-        deadline);
-    if (rows.size() == 0) return std::nullopt;
-    return RevokedElsewhere{parseEnvironment(rows.text(0, 0)).value_or(environment), rows.text(0, 1)};
-}
-
-Standing standingOf(PostgresConnection& connection, Environment environment, const Record& record,
-                    Deadline deadline) {
-    Standing standing{isRevoked(connection, environment, record.name, deadline), std::nullopt};
-    if (!record.revoked) standing.elsewhere = revokedBeside(connection, environment, record, deadline);
-    return standing;
-}
-
-std::vector<CodeHash> hashesOf(PostgresConnection& connection, Environment environment,
-                               const std::string& name, Deadline deadline) {
-    const PostgresRows rows = connection.query(
-        "SELECT algorithm, hash FROM hash WHERE environment = $1 AND name = $2 ORDER BY position",
-        {nameOf(environment), name}, deadline);
-    std::vector<CodeHash> hashes;
-    for (std::size_t row = 0; row < rows.size(); ++row) {
-        hashes.push_back(
-            {static_cast<std::uint32_t>(rows.integer(row, 0)), foundation::toData(rows.bytes(row, 1))});
-    }
-    return hashes;
 }
 
 /// From the columns `asset, length(ticket), ticket`, starting at `column`; the last may be NULL for an asset.
@@ -132,10 +36,6 @@ Delivery readDelivery(const PostgresRows& rows, std::size_t row, int column) {
                                          static_cast<std::uint64_t>(rows.integer(row, column + 1))};
     }
     return delivery;
-}
-
-void requireName(const std::string& name) {
-    if (!canNameARecord(name)) throw Failure(EX_DATAERR, format("%@ is not the name of a record", name));
 }
 
 /// Refuses a server that the role cannot use.
@@ -167,7 +67,7 @@ void bringForward(PostgresConnection& connection, const PostgresPlace& place) {
                                "to version %d",
                                *version, kPostgresVersion));
     }
-    connection.execute(kBeginChange, deadline);
+    connection.execute(kBeginPostgresChange, deadline);
     connection.execute("SET LOCAL statement_timeout = 0", deadline);
     upgradePostgresSchema(connection, deadline);
     connection.execute("COMMIT", deadline);
@@ -184,7 +84,7 @@ void PostgresStore::create(const PostgresPlace& place,
         if (postgresVersion(connection, soon()).value_or(0) > kPostgresVersion) {
             bringForward(connection, place);  // reports it
         }
-        connection.execute(kBeginChange, soon());
+        connection.execute(kBeginPostgresChange, soon());
         connection.execute(
             "SET LOCAL statement_timeout = 0; SET LOCAL lock_timeout = 0;"
             " SET LOCAL idle_in_transaction_session_timeout = 0",
@@ -341,93 +241,6 @@ std::size_t PostgresStore::countRecords() {
     });
 }
 
-/// Runs work within a transaction that has the store's lock, and repeats it if the connection is lost. The
-/// outcome's event shows whether a commit without a response took place. When this returns, the changes are
-/// on the server's disk.
-PutOutcome PostgresStore::changing(const std::function<PutOutcome(PostgresConnection&, Deadline)>& work) {
-    const Deadline deadline = Clock::now() + kChangingTime;
-    for (;;) {
-        try {
-            auto lease = pool_.take(deadline);
-            lease.discard();
-            lease->execute(kBeginChange, deadline);
-            lockStore(*lease, deadline);
-            if (guard_) guard_(StoreUse::changing);
-            PutOutcome outcome = work(*lease, deadline);
-            // From here on only the server decides: a time limit would interrupt its wait for a replica that
-            // must also have the change.
-            lease->execute("SET LOCAL statement_timeout = 0", deadline);
-            if (commit(lease, deadline) || wasCommitted(outcome.event.hash, deadline)) return outcome;
-        } catch (const PostgresError& error) {
-            // Nothing was committed: the transaction failed before the commit.
-            const bool another = error.lost() || error.state().starts_with("40");
-            if (!another || Clock::now() + kPauseBeforeTryingAgain >= deadline) throw asFailure(error);
-            pool_.closeIdle();
-        }
-        std::this_thread::sleep_for(kPauseBeforeTryingAgain);
-    }
-}
-
-/// Returns false if the connection was lost: the outcome of the transaction is then unknown.
-bool PostgresStore::commit(PostgresPool::Lease& lease, Deadline deadline) {
-    try {
-        lease->execute("COMMIT", deadline);
-    } catch (const PostgresError& error) {
-        if (!error.lost()) throw;
-        return false;
-    }
-    lease.keep();
-    return true;
-}
-
-PutOutcome PostgresStore::put(Environment environment, const std::vector<SignedRecord>& records,
-                              const Occasion& occasion) {
-    for (const SignedRecord& entry : records) requireName(entry.record.name);
-    return changing([&](PostgresConnection& connection, Deadline deadline) {
-        if (auto earlier = findRequest(connection, occasion, deadline)) return *std::move(earlier);
-        Head head = lastEventOf(connection, deadline);
-        std::int64_t added = 0;
-        PutOutcome outcome;
-        PostgresBatch batch;
-        for (const SignedRecord& entry : records) {
-            const Standing before = standingOf(connection, environment, entry.record, deadline);
-            const Action action = actionOf(environment, entry.record, before, occasion);
-            std::optional<SignedRecord> joined;  // a ticket is copied only with an earlier one in the store
-            if (before.revoked) {
-                joined = entry;
-                keepEarlierHashes(joined->record,
-                                  hashesOf(connection, environment, entry.record.name, deadline));
-                connection.query("DELETE FROM record WHERE environment = $1 AND name = $2",
-                                 {nameOf(environment), entry.record.name}, deadline);
-            } else {
-                ++added;
-            }
-            const Event event = makeEvent(environment, entry, action, occasion, std::move(head.hash));
-            batch.add(environment, joined ? *joined : entry);
-            batch.add(event, ++head.position);
-            batch.write(connection, deadline);
-            head.hash = event.hash;
-            if (outcome.event.hash.empty()) outcome.event = event;
-        }
-        connection.query("UPDATE store SET records = records + $1", {added}, deadline);
-        if (!records.empty())
-            keepRequest(connection, occasion, outcome.event, records.front().ticket, deadline);
-        return outcome;
-    });
-}
-
-void PostgresStore::noteRefusal(const RefusedAttempt& attempt, const Occasion& occasion) {
-    if (!attempt.record.empty()) requireName(attempt.record);
-    changing([&](PostgresConnection& connection, Deadline deadline) {
-        Head head = lastEventOf(connection, deadline);
-        PutOutcome outcome{makeEvent(attempt, occasion, std::move(head.hash)), std::nullopt};
-        PostgresBatch batch;
-        batch.add(outcome.event, head.position + 1);
-        batch.write(connection, deadline);
-        return outcome;
-    });
-}
-
 RecordPage PostgresStore::search(const RecordSearch& search) {
     return reading([&](PostgresConnection& connection, Deadline deadline) {
         return searchRecords(connection, search, deadline);
@@ -439,29 +252,6 @@ EventPage PostgresStore::search(const EventSearch& search) {
     return reading([&](PostgresConnection& connection, Deadline deadline) {
         return searchEvents(connection, search, deadline);
     });
-}
-
-bool PostgresStore::wasCommitted(const std::string& eventHash, Deadline deadline) {
-    for (;;) {
-        pool_.closeIdle();
-        try {
-            auto connection = pool_.take(deadline);
-            connection.discard();
-            connection->execute(kBeginChange, deadline);
-            // With the lock, the earlier transaction is known to be over.
-            lockStore(*connection, deadline);
-            return connection->query("SELECT 1 FROM event WHERE hash = $1", {eventHash}, deadline).size() > 0;
-        } catch (const PostgresError& error) {
-            if (Clock::now() + kPauseBeforeTryingAgain >= deadline) {
-                throw Failure(
-                    EX_TEMPFAIL,
-                    format("record store: the database was lost during the commit (%@); whether the "
-                           "change was made is not known: lumora-local log shows it",
-                           std::string_view(error.what())));
-            }
-        }
-        std::this_thread::sleep_for(kPauseBeforeTryingAgain);
-    }
 }
 
 StoreFacts PostgresStore::facts() {
@@ -555,20 +345,6 @@ void PostgresStore::walkContents(const ContentsVisitor& visitor) {
                            {readRecord(rows, 0), foundation::toData(rows.bytes(0, 6))});
         });
     });
-}
-
-void PostgresStore::holdStill(const std::function<void(const std::function<void()>& confirm)>& work) {
-    try {
-        const auto soon = [] { return Clock::now() + kChangingTime; };
-        auto connection = pool_.take(soon());
-        connection.discard();
-        connection->execute(kBeginChange, soon());
-        connection->execute("SET LOCAL idle_in_transaction_session_timeout = 0", soon());
-        lockStore(*connection, soon());
-        work([&] { connection->execute("SELECT 1", soon()); });
-    } catch (const PostgresError& error) {
-        throw asFailure(error);
-    }
 }
 
 }  // namespace pinwell::lumora

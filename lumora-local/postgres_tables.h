@@ -1,6 +1,14 @@
-// Rows of the PostgreSQL tables, in and out.
+// The tables of a record store in PostgreSQL: their versions, their rows in and out, and searches of them.
+//
+// All of them are in the schema `lumora` of the service's own database, whose encoding is UTF-8. Names of
+// records are text, because they are ASCII. Labels, actors and comments are bytes: they come from file names
+// and command lines, which may be in any encoding, and the chain of events is over their bytes.
+//
+// The table `store` has one row. Every writer locks it first. So only one writes at a time, and the chain of
+// events stays one chain.
 #pragma once
 
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -8,6 +16,28 @@
 #include "lumora-local/record_store.h"
 
 namespace pinwell::lumora {
+
+inline constexpr int kPostgresVersion = 2;
+
+/// The version of the store's tables; `nullopt` if the database has none. Throws PostgresError.
+std::optional<int> postgresVersion(PostgresConnection& connection, Deadline deadline);
+
+/// Within the caller's transaction: makes the tables, or upgrades tables of an earlier version to the current
+/// one. Throws PostgresError.
+void upgradePostgresSchema(PostgresConnection& connection, Deadline deadline);
+
+inline constexpr const char* kBeginPostgresChange = "BEGIN ISOLATION LEVEL READ COMMITTED READ WRITE";
+
+/// Locks the store until the end of the caller's transaction. Throws PostgresError; Failure (EX_CONFIG) if
+/// another process has brought it to another version.
+void lockStore(PostgresConnection& connection, Deadline deadline);
+
+/// The end of the chain of events.
+struct PostgresHead {
+    std::string hash = hashBeforeTheFirstEvent();
+    std::int64_t position = 0;
+};
+PostgresHead lastEventOf(PostgresConnection& connection, Deadline deadline);
 
 inline constexpr const char* kPostgresEventColumns =
     "time, actor, action, environment, record, label, reason, comment, ticket, previous, hash";
@@ -87,5 +117,12 @@ class PostgresBatch {
 
 /// Whether the text is printable ASCII. No other text names a record of this store.
 bool canNameARecord(std::string_view name);
+
+/// Throws Failure (EX_DATAERR) unless canNameARecord().
+void requireName(const std::string& name);
+
+/// Searches, a page at a time. Both throw PostgresError.
+RecordPage searchRecords(PostgresConnection& connection, const RecordSearch& search, Deadline deadline);
+EventPage searchEvents(PostgresConnection& connection, const EventSearch& search, Deadline deadline);
 
 }  // namespace pinwell::lumora
