@@ -2,7 +2,7 @@
 #include "foundation/format.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/metrics.h"
-#include "lumora-local/token_key.h"
+#include "lumora-local/signing_key.h"
 
 namespace pinwell::lumora {
 

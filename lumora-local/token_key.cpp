@@ -1,4 +1,4 @@
-#include "lumora-local/token_key.h"
+#include "lumora-local/signing_key.h"
 
 #include <openssl/core_names.h>
 #include <openssl/ecdsa.h>

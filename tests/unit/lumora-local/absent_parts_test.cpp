@@ -7,7 +7,7 @@
 #include "lumora-local/metrics.h"
 #include "lumora-local/migration.h"
 #include "lumora-local/service_directory.h"
-#include "lumora-local/signing_process.h"
+#include "lumora-local/signing_key.h"
 #include "lumora-local/store_opening.h"
 #include "support/temporary_directory.h"
 

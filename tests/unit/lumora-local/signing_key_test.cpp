@@ -1,5 +1,5 @@
 // The process that uses a token, with misbehaving tokens.
-#include "lumora-local/signing_process.h"
+#include "lumora-local/signing_key.h"
 
 #include <gtest/gtest.h>
 #include <unistd.h>
