@@ -6,11 +6,10 @@
 #include "foundation/format.h"
 #include "lumora-local/backup.h"
 #include "lumora-local/check_command.h"
+#include "lumora-local/command_line.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/key_commands.h"
 #include "lumora-local/service_directory.h"
-#include "lumora-local/service_place.h"
-#include "lumora-local/terminal.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -6,9 +6,9 @@
 #include <thread>
 
 #include "admin_instance.h"
+#include "lumora-local/command_line.h"
 #include "lumora-local/history.h"
 #include "lumora-local/postgres_store.h"
-#include "lumora-local/service_place.h"
 #include "postgres_cluster.h"
 #include "serving_instance.h"
 

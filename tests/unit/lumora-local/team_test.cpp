@@ -7,9 +7,9 @@
 
 #include "foundation/base64.h"
 #include "foundation/format.h"
+#include "lumora-local/command_line.h"
 #include "lumora-local/history.h"
 #include "lumora-local/postgres_store.h"
-#include "lumora-local/service_place.h"
 #include "postgres_cluster.h"
 #include "running_service.h"
 #include "serving_instance.h"
