@@ -9,7 +9,7 @@
 #include "foundation/format.h"
 #include "lumora-local/admin_routes.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/store_opening.h"
+#include "lumora-local/service_store.h"
 
 namespace pinwell::lumora {
 namespace {

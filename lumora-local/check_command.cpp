@@ -17,7 +17,7 @@
 #include "lumora-local/key_commands.h"
 #include "lumora-local/key_file.h"
 #include "lumora-local/rfc3339.h"
-#include "lumora-local/store_opening.h"
+#include "lumora-local/service_store.h"
 
 namespace pinwell::lumora {
 namespace {

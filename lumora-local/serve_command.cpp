@@ -22,7 +22,7 @@
 #include "lumora-local/metrics.h"
 #include "lumora-local/server.h"
 #include "lumora-local/service_manager.h"
-#include "lumora-local/store_opening.h"
+#include "lumora-local/service_store.h"
 #include "sandbox/sandbox.h"
 
 namespace pinwell::lumora {

@@ -5,10 +5,9 @@
 
 #include "lumora-local/failure.h"
 #include "lumora-local/metrics.h"
-#include "lumora-local/migration.h"
 #include "lumora-local/service_directory.h"
+#include "lumora-local/service_store.h"
 #include "lumora-local/signing_key.h"
-#include "lumora-local/store_opening.h"
 #include "support/temporary_directory.h"
 
 namespace pinwell::lumora {

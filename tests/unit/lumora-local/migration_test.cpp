@@ -1,5 +1,5 @@
 // Moving a service's records into a database, and the messages about unsuitable databases.
-#include "lumora-local/migration.h"
+#include "lumora-local/service_store.h"
 
 #include <SQLiteCpp/SQLiteCpp.h>
 #include <gtest/gtest.h>
@@ -10,7 +10,6 @@
 #include "lumora-local/failure.h"
 #include "lumora-local/history.h"
 #include "lumora-local/sqlite_store.h"
-#include "lumora-local/store_opening.h"
 #include "postgres_cluster.h"
 #include "serving_instance.h"
 
