@@ -1,4 +1,4 @@
-#include "lumora-local/token_buckets.h"
+#include "lumora-local/admin_service.h"
 
 #include <gtest/gtest.h>
 
