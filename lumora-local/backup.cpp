@@ -1,5 +1,3 @@
-#include "lumora-local/backup.h"
-
 #include <SQLiteCpp/SQLiteCpp.h>
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -19,6 +17,7 @@
 #include "lumora-local/history.h"
 #include "lumora-local/sqlite_store.h"
 #include "lumora-local/sqlite_tables.h"
+#include "lumora-local/upkeep.h"
 
 namespace pinwell::lumora {
 namespace {

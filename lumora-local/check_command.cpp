@@ -1,5 +1,3 @@
-#include "lumora-local/check_command.h"
-
 #include <algorithm>
 #include <charconv>
 #include <filesystem>
@@ -14,10 +12,10 @@
 #include "lumora-local/certificate_file.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/history.h"
-#include "lumora-local/key_commands.h"
 #include "lumora-local/key_file.h"
 #include "lumora-local/rfc3339.h"
 #include "lumora-local/service_store.h"
+#include "lumora-local/upkeep.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -1,5 +1,3 @@
-#include "lumora-local/key_commands.h"
-
 #include <algorithm>
 #include <filesystem>
 #include <system_error>
@@ -14,6 +12,7 @@
 #include "lumora-local/key_file.h"
 #include "lumora-local/rfc3339.h"
 #include "lumora-local/tls_context.h"
+#include "lumora-local/upkeep.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -26,7 +26,7 @@
 #include "lumora-local/serve_command.h"
 #include "lumora-local/service_directory.h"
 #include "lumora-local/service_store.h"
-#include "lumora-local/upkeep_verbs.h"
+#include "lumora-local/upkeep.h"
 #include "sandbox/sandbox.h"
 #include "src/confinement.h"
 

@@ -1,15 +1,11 @@
-#include "lumora-local/upkeep_verbs.h"
-
 #include <CLI/CLI.hpp>
 
 #include "foundation/date.h"
 #include "foundation/format.h"
-#include "lumora-local/backup.h"
-#include "lumora-local/check_command.h"
 #include "lumora-local/command_line.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/key_commands.h"
 #include "lumora-local/service_directory.h"
+#include "lumora-local/upkeep.h"
 
 namespace pinwell::lumora {
 namespace {

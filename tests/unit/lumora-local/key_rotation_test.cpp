@@ -1,5 +1,5 @@
 // Keys that are encrypted, stored elsewhere, certified elsewhere and replaced; and the check of a service.
-#include "lumora-local/key_commands.h"
+#include "lumora-local/upkeep.h"
 
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -9,7 +9,6 @@
 #include "certificates.h"
 #include "fixed_now.h"
 #include "lumora-local/authority.h"
-#include "lumora-local/check_command.h"
 #include "lumora-local/failure.h"
 #include "support/environment.h"
 #include "support/temporary_directory.h"

@@ -6,8 +6,8 @@
 
 #include <functional>
 
-#include "lumora-local/backup.h"
 #include "lumora-local/failure.h"
+#include "lumora-local/upkeep.h"
 #include "sample_record.h"
 #include "support/temporary_directory.h"
 
