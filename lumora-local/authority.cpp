@@ -1,7 +1,6 @@
 #include "lumora-local/authority.h"
 
-#include "lumora-local/certificate_file.h"
-#include "lumora-local/certificate_maker.h"
+#include "lumora-local/certificates.h"
 #include "lumora-local/endpoint.h"
 #include "lumora-local/key_file.h"
 #include "lumora-local/openssl_handles.h"

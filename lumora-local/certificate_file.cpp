@@ -1,9 +1,8 @@
-#include "lumora-local/certificate_file.h"
-
 #include <ctime>
 
 #include "foundation/file_io.h"
 #include "lumora-local/authority.h"
+#include "lumora-local/certificates.h"
 
 namespace pinwell::lumora {
 namespace {

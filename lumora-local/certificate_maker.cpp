@@ -1,5 +1,5 @@
-#include "lumora-local/certificate_maker.h"
 #include "foundation/bytes.h"
+#include "lumora-local/certificates.h"
 
 #include <openssl/asn1.h>
 #include <openssl/bn.h>

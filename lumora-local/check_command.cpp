@@ -9,7 +9,7 @@
 #include "foundation/markup.h"
 #include "foundation/platform_directory.h"
 #include "lumora-local/access_list.h"
-#include "lumora-local/certificate_file.h"
+#include "lumora-local/certificates.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/history.h"
 #include "lumora-local/key_file.h"

@@ -6,7 +6,7 @@
 #include "foundation/platform_directory.h"
 #include "foundation/value.h"
 #include "lumora-local/authority.h"
-#include "lumora-local/certificate_file.h"
+#include "lumora-local/certificates.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/key_file.h"

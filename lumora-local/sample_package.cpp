@@ -17,7 +17,7 @@
 
 #include "foundation/base64.h"
 #include "foundation/byte_writer.h"
-#include "lumora-local/certificate_maker.h"
+#include "lumora-local/certificates.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/samples.h"
 #include "lumora-local/sha256.h"

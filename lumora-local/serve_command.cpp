@@ -14,7 +14,7 @@
 
 #include "foundation/format.h"
 #include "lumora-local/admin_listener.h"
-#include "lumora-local/certificate_file.h"
+#include "lumora-local/certificates.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/key_file.h"

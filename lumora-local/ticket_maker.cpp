@@ -5,7 +5,7 @@
 #include <algorithm>
 
 #include "foundation/byte_writer.h"
-#include "lumora-local/certificate_file.h"
+#include "lumora-local/certificates.h"
 #include "lumora-local/openssl_handles.h"
 
 namespace pinwell::lumora {

@@ -12,7 +12,7 @@
 
 #include "foundation/format.h"
 #include "foundation/utf8.h"
-#include "lumora-local/certificate_file.h"
+#include "lumora-local/certificates.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/key_file.h"
 #include "lumora-local/openssl_handles.h"

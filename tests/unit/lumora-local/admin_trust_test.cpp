@@ -2,8 +2,7 @@
 #include <gtest/gtest.h>
 
 #include "admin_instance.h"
-#include "lumora-local/certificate_file.h"
-#include "lumora-local/certificate_maker.h"
+#include "lumora-local/certificates.h"
 #include "lumora-local/key_file.h"
 #include "serving_instance.h"
 
