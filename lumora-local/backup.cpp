@@ -12,9 +12,9 @@
 
 #include "foundation/file_io.h"
 #include "foundation/format.h"
+#include "lumora-local/event.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
-#include "lumora-local/history.h"
 #include "lumora-local/sqlite_store.h"
 #include "lumora-local/sqlite_tables.h"
 #include "lumora-local/upkeep.h"

@@ -1,4 +1,4 @@
-// The log of a record service: each change of a record, with its time, actor and reason.
+// The log of a record service: each change of a record, with its time, actor and reason; shown and checked.
 //
 // Events are never changed or removed. Each event has the hash of the previous one. So a check of the chain
 // finds an altered, removed or inserted event. An event's hash is SHA-256 over these fields, in this order,
@@ -17,6 +17,7 @@
 //                empty if refused
 #pragma once
 
+#include <functional>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -26,6 +27,9 @@
 #include "lumora-local/record_name.h"
 
 namespace pinwell::lumora {
+
+class RecordStore;
+struct EventQuery;
 
 /// The change of a record. `refused`: none; a client without the right, or with an impossible request, tried
 /// to change it.
@@ -73,5 +77,22 @@ std::string describeEvent(const Event& event);
 
 /// For programs: one JSON object without a line end. `environment` is there if it is not production.
 std::string eventAsJson(const Event& event);
+
+using TextSink = std::function<void(std::string_view)>;
+
+/// Hands the selected events to `sink`, oldest first: for people one line each (describeEvent), or one JSON
+/// document {"events": [...]}. Throws Failure.
+void writeEvents(RecordStore& store, const EventQuery& query, bool asJson, const TextSink& sink);
+
+/// The result of a successful check of the whole history.
+struct HistorySummary {
+    std::size_t events = 0;
+    std::string head;  // hash of the last event
+};
+
+/// Walks the chain of events and compares each record with the last event about it. `knownHead` is the hash
+/// of an event that must be in the chain, so that a cut end shows. Throws Failure (EX_CONFIG) that names the
+/// first event or record that does not fit.
+HistorySummary verifyHistory(RecordStore& store, const std::optional<std::string>& knownHead);
 
 }  // namespace pinwell::lumora

@@ -6,8 +6,8 @@
 #include <mutex>
 
 #include "foundation/format.h"
+#include "lumora-local/event.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/history.h"
 #include "lumora-local/postgres_pool.h"
 #include "lumora-local/postgres_store.h"
 #include "lumora-local/sha256.h"

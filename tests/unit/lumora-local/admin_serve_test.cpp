@@ -10,7 +10,7 @@
 #include "admin_instance.h"
 #include "foundation/json.h"
 #include "foundation/value.h"
-#include "lumora-local/history.h"
+#include "lumora-local/event.h"
 #include "lumora-local/sqlite_store.h"
 #include "running_service.h"
 #include "serving_instance.h"

@@ -7,7 +7,7 @@
 
 #include "admin_instance.h"
 #include "lumora-local/command_line.h"
-#include "lumora-local/history.h"
+#include "lumora-local/event.h"
 #include "lumora-local/postgres_store.h"
 #include "postgres_cluster.h"
 #include "serving_instance.h"

@@ -1,4 +1,4 @@
-#include "lumora-local/history.h"
+#include "lumora-local/event.h"
 
 #include <SQLiteCpp/SQLiteCpp.h>
 #include <gtest/gtest.h>

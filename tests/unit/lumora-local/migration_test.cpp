@@ -7,8 +7,8 @@
 #include <algorithm>
 
 #include "killed_child.h"
+#include "lumora-local/event.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/history.h"
 #include "lumora-local/sqlite_store.h"
 #include "postgres_cluster.h"
 #include "serving_instance.h"

@@ -6,8 +6,8 @@
 #include <thread>
 
 #include "commit_cutter.h"
+#include "lumora-local/event.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/history.h"
 #include "lumora-local/postgres_pool.h"
 #include "postgres_cluster.h"
 #include "sample_record.h"

@@ -7,8 +7,8 @@
 #include <memory>
 #include <thread>
 
+#include "lumora-local/event.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/history.h"
 #include "lumora-local/sha256.h"
 #include "lumora-local/store_rules.h"
 #include "sample_record.h"

@@ -4,7 +4,7 @@
 #include <atomic>
 #include <thread>
 
-#include "lumora-local/history.h"
+#include "lumora-local/event.h"
 #include "sample_record.h"
 #include "store_kinds.h"
 

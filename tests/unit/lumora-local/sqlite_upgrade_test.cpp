@@ -5,8 +5,8 @@
 #include <thread>
 #include <vector>
 
+#include "lumora-local/event.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/history.h"
 #include "lumora-local/sqlite_store.h"
 #include "support/temporary_directory.h"
 

@@ -5,7 +5,7 @@
 #include <memory>
 
 #include "killed_child.h"
-#include "lumora-local/history.h"
+#include "lumora-local/event.h"
 #include "sample_record.h"
 #include "store_kinds.h"
 

@@ -8,7 +8,7 @@
 #include "foundation/base64.h"
 #include "foundation/format.h"
 #include "lumora-local/command_line.h"
-#include "lumora-local/history.h"
+#include "lumora-local/event.h"
 #include "lumora-local/postgres_store.h"
 #include "postgres_cluster.h"
 #include "running_service.h"
