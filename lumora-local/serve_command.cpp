@@ -4,13 +4,23 @@
 #include <signal.h>
 #include <sys/resource.h>
 #include <sys/signalfd.h>
+#include <sys/socket.h>
 #include <sys/statvfs.h>
+#include <sys/timerfd.h>
+#include <sys/un.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <array>
+#include <charconv>
+#include <chrono>
+#include <cstddef>
+#include <cstdlib>
+#include <cstring>
 #include <initializer_list>
 #include <mutex>
+#include <optional>
+#include <string_view>
 
 #include "foundation/format.h"
 #include "lumora-local/admin_listener.h"
@@ -21,7 +31,6 @@
 #include "lumora-local/lookup.h"
 #include "lumora-local/metrics.h"
 #include "lumora-local/server.h"
-#include "lumora-local/service_manager.h"
 #include "lumora-local/service_store.h"
 #include "sandbox/sandbox.h"
 
@@ -58,6 +67,81 @@ Obstacle fullDiskAt(const std::string& path) {
         if (std::uint64_t{status.f_bavail} * status.f_frsize >= kLeast) return std::nullopt;
         return "There is no space left for records";
     };
+}
+
+template <class Number>
+std::optional<Number> numberIn(const char* text) {
+    if (text == nullptr) return std::nullopt;
+    Number number = 0;
+    const char* end = text + std::strlen(text);
+    const auto [stop, error] = std::from_chars(text, end, number);
+    if (error != std::errc{} || stop != end || number <= 0) return std::nullopt;
+    return number;
+}
+
+foundation::FileDescriptor connectTo(std::string_view name) {
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    const bool usable = name.size() > 1 && name.size() < sizeof address.sun_path;
+    if (!usable || (name[0] != '/' && name[0] != '@')) return {};
+    std::memcpy(address.sun_path, name.data(), name.size());
+    if (name[0] == '@') address.sun_path[0] = '\0';  // an abstract name, which has no end mark
+    const auto length = static_cast<socklen_t>(offsetof(sockaddr_un, sun_path) + name.size());
+    foundation::FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+    // The socket interface's own cast: every address family shares this header.
+    const auto* generic = reinterpret_cast<const sockaddr*>(&address);
+    if (!socket || ::connect(socket.get(), generic, length) != 0) return {};
+    return socket;
+}
+
+/// Reports to the service manager: sd_notify(3), one small datagram each. The protocol is documented and
+/// stable, and this is the whole part that a service needs. Its library would be the larger part of the
+/// loaded code.
+///
+/// For any thread.
+class ServiceManager {
+  public:
+    /// Takes the manager's address from $NOTIFY_SOCKET. Without it, with an invalid address, and
+    /// after the manager has gone, it sends nothing. Make it before the process gives up its
+    /// rights.
+    ServiceManager();
+
+    /// Variables of sd_notify(3), one a line: "READY=1".
+    void tell(std::string_view state) const noexcept;
+
+    /// Half of the interval at which the manager expects a notification; `nullopt` if it expects none
+    /// ($WATCHDOG_USEC, $WATCHDOG_PID).
+    std::optional<std::chrono::microseconds> signOfLife() const noexcept { return signOfLife_; }
+
+  private:
+    foundation::FileDescriptor socket_;
+    std::optional<std::chrono::microseconds> signOfLife_;
+};
+
+ServiceManager::ServiceManager() {
+    const char* name = std::getenv("NOTIFY_SOCKET");
+    if (name == nullptr) return;
+    socket_ = connectTo(name);
+    const auto interval = numberIn<std::int64_t>(std::getenv("WATCHDOG_USEC"));
+    const char* process = std::getenv("WATCHDOG_PID");
+    const bool ours = process == nullptr || numberIn<pid_t>(process) == ::getpid();
+    if (socket_ && interval && ours) signOfLife_ = std::chrono::microseconds(*interval / 2 + 1);
+}
+
+void ServiceManager::tell(std::string_view state) const noexcept {
+    if (socket_) ::send(socket_.get(), state.data(), state.size(), MSG_NOSIGNAL | MSG_DONTWAIT);
+}
+
+/// Becomes readable every `interval`; each time is read as eight bytes. Throws Failure.
+foundation::FileDescriptor makeTicker(std::chrono::microseconds interval) {
+    constexpr std::int64_t kMillion = 1'000'000;
+    foundation::FileDescriptor timer(::timerfd_create(CLOCK_MONOTONIC, TFD_CLOEXEC | TFD_NONBLOCK));
+    const timespec step{interval.count() / kMillion, interval.count() % kMillion * 1000};
+    const itimerspec times{step, step};
+    if (!timer || ::timerfd_settime(timer.get(), 0, &times, nullptr) != 0) {
+        throw Failure(EX_OSERR, "cannot make a timer");
+    }
+    return timer;
 }
 
 /// Reports readiness to the service manager, and sends the notifications that it expects.
