@@ -1,12 +1,12 @@
-#include "foundation/bytes.h"
-#include "lumora-local/certificates.h"
-
 #include <openssl/asn1.h>
 #include <openssl/bn.h>
 #include <openssl/ec.h>
 #include <openssl/rsa.h>
 
 #include <ctime>
+
+#include "foundation/bytes.h"
+#include "lumora-local/certificates.h"
 
 namespace pinwell::lumora {
 namespace {

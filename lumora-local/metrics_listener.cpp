@@ -1,5 +1,3 @@
-#include "lumora-local/metrics.h"
-
 #include <atomic>
 #include <boost/asio/io_context.hpp>
 #include <boost/asio/ip/tcp.hpp>
@@ -15,6 +13,8 @@
 #include <optional>
 #include <thread>
 #include <utility>
+
+#include "lumora-local/metrics.h"
 
 namespace pinwell::lumora {
 namespace {

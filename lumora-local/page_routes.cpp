@@ -1,8 +1,7 @@
-#include "lumora-local/admin_routes.h"
-
 #include <utility>
 
 #include "foundation/format.h"
+#include "lumora-local/admin_routes.h"
 #include "lumora-local/admin_service.h"
 #include "lumora-local/page.h"
 #include "lumora-local/record_name.h"

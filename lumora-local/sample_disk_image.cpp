@@ -31,8 +31,6 @@
 // | 1       | the file allocation table, one copy                       |
 // | 2       | the root directory: volume label, README.TXT              |
 // | from 3  | clusters of one sector each, numbered from 2              |
-#include "lumora-local/samples.h"
-
 #include <algorithm>
 #include <cstdint>
 #include <utility>
@@ -41,6 +39,7 @@
 #include "foundation/byte_writer.h"
 #include "lumora-local/ad_hoc_signature.h"
 #include "lumora-local/file_writing.h"
+#include "lumora-local/samples.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -1,5 +1,4 @@
 #include "lumora-local/sqlite_store.h"
-#include "lumora-local/store_rules.h"
 
 #include <SQLiteCpp/SQLiteCpp.h>
 
@@ -13,6 +12,7 @@
 #include "lumora-local/file_writing.h"
 #include "lumora-local/sha256.h"
 #include "lumora-local/sqlite_tables.h"
+#include "lumora-local/store_rules.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -1,11 +1,9 @@
-#include "lumora-local/signing_key.h"
-
 #include <openssl/core_names.h>
 #include <openssl/ecdsa.h>
 #include <openssl/param_build.h>
+
 #include <p11-kit/p11-kit.h>
 #include <p11-kit/uri.h>
-
 #include <algorithm>
 #include <array>
 #include <optional>
@@ -13,6 +11,7 @@
 
 #include "lumora-local/key_file.h"
 #include "lumora-local/openssl_handles.h"
+#include "lumora-local/signing_key.h"
 
 namespace pinwell::lumora {
 namespace {
