@@ -27,7 +27,7 @@ void expectConfigurationFailure(const std::function<void()>& work, const std::st
 }
 
 #if PINWELL_WITHOUT_POSTGRESQL
-TEST(WithoutPostgres, ADatabaseIsRefusedByTheFileThatNamesIt) {
+TEST(WithoutPostgres, RefusesADatabaseAndNamesTheFile) {
     const TemporaryDirectory directory;
     const auto service = ServiceDirectory::create(directory / "service", {}, foundation::Date::now());
     writeFile(service.descriptionPath(),
@@ -37,7 +37,7 @@ TEST(WithoutPostgres, ADatabaseIsRefusedByTheFileThatNamesIt) {
     expectConfigurationFailure(open, service.descriptionPath());
 }
 
-TEST(WithoutPostgres, NothingMovesToADatabase) {
+TEST(WithoutPostgres, RefusesToMigrate) {
     const TemporaryDirectory directory;
     const auto service = ServiceDirectory::create(directory / "service", {}, foundation::Date::now());
     expectConfigurationFailure([&] { migrate(service, "postgresql:///lumora"); }, "built without PostgreSQL");
@@ -45,14 +45,14 @@ TEST(WithoutPostgres, NothingMovesToADatabase) {
 #endif
 
 #if PINWELL_WITHOUT_PKCS11
-TEST(WithoutPkcs11, AKeyInATokenIsRefused) {
+TEST(WithoutPkcs11, RefusesAKeyInAToken) {
     expectConfigurationFailure([] { openSigningKey("pkcs11:token=lumora?pin-value=1234", {}); },
                                "cannot use pkcs11:token=lumora: this program was built without PKCS #11");
 }
 #endif
 
 #if PINWELL_WITHOUT_METRICS
-TEST(WithoutMetrics, MetricsAreRefused) {
+TEST(WithoutMetrics, RefusesMetrics) {
     expectConfigurationFailure(requireMetrics, "cannot offer metrics: this program was built without them");
 }
 #endif

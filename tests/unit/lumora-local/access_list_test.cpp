@@ -41,7 +41,7 @@ TEST_F(AccessListTest, GivesClientsTheirRoles) {
     EXPECT_EQ(list.of("R\u00fcdiger B"), (Rights{false, true, false}));
 }
 
-TEST_F(AccessListTest, GivesNothingToOthers) {
+TEST_F(AccessListTest, GivesNoRoleToUnlistedClients) {
     write("[clients]\n\"ci.example\" = [\"issue\"]\n");
     const AccessList list(path_);
     for (const char* name : {"", "ci", "CI.EXAMPLE", "ci.example ", "clients"})
@@ -65,12 +65,12 @@ TEST_F(AccessListTest, NamesTheFileAndTheLineOfAFault) {
     EXPECT_EQ(faultOf("clients = 1\n"), path_ + ":1: clients is no table");
 }
 
-TEST_F(AccessListTest, NamesAClientThatIsThereTwice) {
+TEST_F(AccessListTest, NamesAClientThatIsListedTwice) {
     EXPECT_EQ(faultOf("[clients]\n\"ci.example\" = [\"read\"]\n\"ci.example\" = [\"issue\"]\n"),
               path_ + ":3: a client is there twice");
 }
 
-TEST_F(AccessListTest, RefusesWhatIsNoRegularFile) {
+TEST_F(AccessListTest, RefusesSpecialFiles) {
     ASSERT_EQ(::mkfifo(path_.c_str(), 0600), 0);
     try {
         readAccessFile(path_);
@@ -80,7 +80,7 @@ TEST_F(AccessListTest, RefusesWhatIsNoRegularFile) {
     }
 }
 
-TEST_F(AccessListTest, RefusesWhatIsNotAListOfRoles) {
+TEST_F(AccessListTest, RefusesValuesOtherThanListsOfRoles) {
     for (const char* value : {"\"read\"", "true", "1", "[1]", "[[\"read\"]]", "{}", "[\"read\", \"Read\"]"}) {
         EXPECT_NE(faultOf(std::string("[clients]\n\"a\" = ") + value + "\n").find(path_ + ":2: "),
                   std::string::npos)
@@ -88,12 +88,12 @@ TEST_F(AccessListTest, RefusesWhatIsNotAListOfRoles) {
     }
 }
 
-TEST_F(AccessListTest, SaysThatANameWithDotsIsInQuotes) {
+TEST_F(AccessListTest, RequiresQuotesAroundANameWithDots) {
     EXPECT_NE(faultOf("[clients]\nci.example = [\"read\"]\n").find("a name with dots is in quotes"),
               std::string::npos);
 }
 
-TEST_F(AccessListTest, RefusesWhatIsNotToml) {
+TEST_F(AccessListTest, RefusesTextThatIsNotToml) {
     EXPECT_NE(faultOf("[clients\n").find(path_ + ":1: "), std::string::npos);
     EXPECT_NE(faultOf("[clients]\n\"a\" = [\"read\"]\n\"a\" = [\"issue\"]\n").find(path_ + ":3: "),
               std::string::npos);
@@ -112,7 +112,7 @@ TEST_F(AccessListTest, RefusesMoreClientsThanItsBound) {
     EXPECT_NE(faultOf(text).find("more than 10000 clients"), std::string::npos);
 }
 
-TEST_F(AccessListTest, RefusesAFileThatIsNotThereOrTooLarge) {
+TEST_F(AccessListTest, RefusesAMissingOrTooLargeFile) {
     EXPECT_THROW(readAccessFile(directory_ / "nothing"), Failure);
     EXPECT_NE(faultOf(std::string(2 * 1024 * 1024, '#')), "none");
 }
@@ -127,7 +127,7 @@ TEST_F(AccessListTest, ReadsItsFileAgain) {
     EXPECT_TRUE(list.of("b").any());
 }
 
-TEST_F(AccessListTest, StaysAsItWasIfTheNewFileCannotBeUsed) {
+TEST_F(AccessListTest, KeepsItsRolesIfTheNewFileIsUnusable) {
     write("[clients]\na = [\"read\"]\n");
     AccessList list(path_);
     write("[clients]\nb = 1\n");

@@ -27,12 +27,12 @@ TEST(AccessLog, HasTheRequestAndTheClientInQuotes) {
                 EndsWith(R"( 127.0.0.1:4 "GET /records?name=2" 200 7 ID "ci.example")"));
 }
 
-TEST(AccessLog, HasQuotesThatNoTextEnds) {
+TEST(AccessLog, EscapesQuotesInTexts) {
     EXPECT_THAT(describeRequest(entryFor(R"(/a" 200 1 X "b\)", R"(me" "you)"), LogForm::text),
                 EndsWith(R"("GET /a\" 200 1 X \"b\\" 200 7 ID "me\" \"you")"));
 }
 
-TEST(AccessLog, ShowsCharactersThatHideOthers) {
+TEST(AccessLog, EscapesInvisibleCharacters) {
     const std::string name = "ci\u202egro\x1b[2J";
     for (const LogForm form : {LogForm::text, LogForm::json}) {
         const std::string line = describeRequest(entryFor("/" + name, name), form);

@@ -29,7 +29,7 @@ std::string with(const std::string& members) {
     return R"({"record":")" + kName + R"(",)" + members + "}";
 }
 
-TEST(TicketBody, NeedsARecordAlone) {
+TEST(TicketBody, RequiresOnlyTheRecord) {
     const TicketRequest request = parseTicketRequest(R"({"record":")" + kName + R"("})");
     EXPECT_EQ(recordName(request.artefact.own), kName);
     EXPECT_TRUE(request.artefact.others.empty());
@@ -38,7 +38,7 @@ TEST(TicketBody, NeedsARecordAlone) {
     EXPECT_FALSE(request.reinstates);
 }
 
-TEST(TicketBody, TakesAllOfItsMembers) {
+TEST(TicketBody, AcceptsAllOfItsMembers) {
     const TicketRequest request = parseTicketRequest(
         with(R"("hashes":["2/2/)" + std::string(40, 'b') + R"(","2/4/)" + std::string(96, 'c') +
              R"("],"label":"Caf\u00e9.app","environment":"development","reinstate":true,"comment":"why")"));
@@ -50,7 +50,7 @@ TEST(TicketBody, TakesAllOfItsMembers) {
     EXPECT_EQ(request.comment, "why");
 }
 
-TEST(TicketBody, IsRefusedIfItIsNoJsonObject) {
+TEST(TicketBody, IsRefusedUnlessItIsAJsonObject) {
     for (const char* body : {"", "{", "[]", "null", "1", "\"a\"", "{\"record\":\"\xff\"}", "{} {}"})
         EXPECT_EQ(ticketStatus(body), 400) << body;
 }
@@ -67,13 +67,13 @@ TEST(TicketBody, IsRefusedIfAMemberIsMissingUnknownOrOfAnotherType) {
 }
 
 /// Another reader of the request, such as a filter, may use the other one.
-TEST(TicketBody, HasEachMemberOnce) {
+TEST(TicketBody, IsRefusedWithARepeatedMember) {
     EXPECT_EQ(ticketStatus(with(R"("label":"a","label":"b")")), 400);
     EXPECT_EQ(ticketStatus(with(R"("label":"a","\u006cabel":"b")")), 400);
     EXPECT_EQ(revocationStatus(with(R"("comment":"a","comment":"b")")), 400);
 }
 
-TEST(TicketBody, KeepsToItsBounds) {
+TEST(TicketBody, IsRefusedBeyondItsBounds) {
     const auto label = [](std::size_t size) { return with(R"("label":")" + std::string(size, 'x') + '"'); };
     EXPECT_EQ(ticketStatus(label(kMaximumLabelBytes)), 0);
     EXPECT_EQ(ticketStatus(label(kMaximumLabelBytes + 1)), 422);
@@ -91,7 +91,7 @@ TEST(TicketBody, KeepsToItsBounds) {
     EXPECT_EQ(ticketStatus(hashes(kMaximumListedHashes + 1)), 422);
 }
 
-TEST(TicketBody, HasNoControlCharactersInItsTexts) {
+TEST(TicketBody, IsRefusedWithControlCharacters) {
     for (const char* text : {R"(a\nb)", R"(\u0000)", R"(\u001b[2J)", R"(\u007f)", R"(\u0085)"}) {
         EXPECT_EQ(ticketStatus(with(std::string(R"("label":")") + text + '"')), 422) << text;
         EXPECT_EQ(ticketStatus(with(std::string(R"("comment":")") + text + '"')), 422) << text;
@@ -104,7 +104,7 @@ TEST(TicketBody, RefusesHashesThatNoTicketListsTogether) {
     EXPECT_EQ(ticketStatus(R"({"record":"1/)" + kHex + R"(","hashes":["2/2/)" + kHex + R"("]})"), 422);
 }
 
-TEST(TicketBody, NeedsACommentToReinstate) {
+TEST(TicketBody, RequiresACommentToReinstate) {
     EXPECT_EQ(ticketStatus(with(R"("reinstate":true)")), 422);
     EXPECT_EQ(ticketStatus(with(R"("reinstate":true,"comment":" \t")")), 422);
     EXPECT_EQ(ticketStatus(with(R"("reinstate":true,"comment":"   ")")), 422);
@@ -112,11 +112,11 @@ TEST(TicketBody, NeedsACommentToReinstate) {
     EXPECT_EQ(ticketStatus(with(R"("reinstate":false)")), 0);
 }
 
-TEST(TicketBody, IsNotNestedDeeply) {
+TEST(TicketBody, IsRefusedIfDeeplyNested) {
     EXPECT_EQ(ticketStatus(with("\"hashes\":" + std::string(100'000, '['))), 400);
 }
 
-TEST(RevocationBody, HasAReasonAndAComment) {
+TEST(RevocationBody, AcceptsAReasonAndAComment) {
     const RevocationRequest request =
         parseRevocationRequest(with(R"("reason":"compromised","comment":"key lost")"));
     EXPECT_EQ(request.record, kName);
@@ -133,7 +133,7 @@ TEST(RevocationBody, IsRefusedIfAMemberIsOutOfBounds) {
     EXPECT_EQ(revocationStatus("7"), 400);
 }
 
-TEST(RefusedAttempt, NamesTheRecordAsFarAsItCanBeRead) {
+TEST(RefusedAttempt, NamesTheRecordIfItCanBeRead) {
     EXPECT_EQ(attemptIn(with(R"("label":7,"environment":"development")")).record, kName);
     EXPECT_EQ(attemptIn(with(R"("label":7,"environment":"development")")).environment,
               Environment::development);
@@ -141,13 +141,13 @@ TEST(RefusedAttempt, NamesTheRecordAsFarAsItCanBeRead) {
         EXPECT_EQ(attemptIn(body).record, "") << body;
 }
 
-TEST(IdempotencyKey, IsInQuotesOrBare) {
+TEST(IdempotencyKey, IsAcceptedWithAndWithoutQuotes) {
     EXPECT_EQ(parseIdempotencyKey("\"8e03978e-40d5\""), "8e03978e-40d5");
     EXPECT_EQ(parseIdempotencyKey("8e03978e-40d5"), "8e03978e-40d5");
     EXPECT_EQ(parseIdempotencyKey(std::string(255, 'k')).size(), 255U);
 }
 
-TEST(IdempotencyKey, IsRefusedIfItIsNone) {
+TEST(IdempotencyKey, IsRefusedIfEmptyTooLongOrInvisible) {
     for (const std::string& header :
          {std::string(), std::string("\"\""), std::string("\""), std::string("a b"),
           std::string("\"a\", \"b\""), std::string("a;b"), std::string("a\\b"), std::string("\"a"),

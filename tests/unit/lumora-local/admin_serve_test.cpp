@@ -120,7 +120,7 @@ TEST_F(AdminServeTest, ReissuesAndRevokesARecordOfThousandsOfHashes) {
     EXPECT_EQ(revoked.status, 200) << revoked.body;
 }
 
-TEST_F(AdminServeTest, HoldsToTheRulesOfTheCommandLine) {
+TEST_F(AdminServeTest, AppliesTheRulesOfTheCommandLine) {
     AdminInstance instance(service_);
     AdminClient manager = instance.client("manager");
     AdminClient builder = instance.client("ci.example");
@@ -141,7 +141,7 @@ TEST_F(AdminServeTest, HoldsToTheRulesOfTheCommandLine) {
     EXPECT_EQ(verified().events, 9U);
 }
 
-TEST_F(AdminServeTest, GivesARepeatedRequestTheSameAnswer) {
+TEST_F(AdminServeTest, ReturnsTheSameResponseToARepeatedRequest) {
     AdminInstance instance(service_);
     AdminClient client = instance.client("manager");
     const AdminAnswer first = client.post(kTickets, bodyFor(recordNamed(1)), "one");
@@ -159,7 +159,7 @@ TEST_F(AdminServeTest, GivesARepeatedRequestTheSameAnswer) {
               4);
 }
 
-TEST_F(AdminServeTest, KnowsARepeatedRequestAfterAKill) {
+TEST_F(AdminServeTest, RecognisesARepeatedRequestAfterAKill) {
     // Wherever the kill interrupts the first attempt, the repeated request is carried out once.
     std::vector<std::string> records;
     for (int round = 0; round < 6; ++round) {
@@ -216,7 +216,7 @@ TEST_F(AdminServeTest, ReadsItsAccessListAgainOnHangUp) {
         << end.errors;
 }
 
-TEST_F(AdminServeTest, ReadsItsAccessListAgainWhateverServiceJsonSays) {
+TEST_F(AdminServeTest, ReadsItsAccessListAgainDespiteAnInvalidServiceJson) {
     AdminInstance instance(service_);
     EXPECT_EQ(instance.client("auditor").get("/v1/records").status, 200);
     writeFile(service_.path() + "/service/service.json", "{");
@@ -226,7 +226,7 @@ TEST_F(AdminServeTest, ReadsItsAccessListAgainWhateverServiceJsonSays) {
     EXPECT_EQ(instance.client("auditor").get("/v1/records").status, 403);
 }
 
-TEST_F(AdminServeTest, EndsConnectionsThatAnEarlierAuthorityVouchedFor) {
+TEST_F(AdminServeTest, ClosesConnectionsOfAReplacedAuthority) {
     AdminInstance instance(service_);
     AdminClient client = instance.client("auditor");
     EXPECT_EQ(client.get("/v1/records").status, 200);
@@ -280,7 +280,7 @@ TEST_F(AdminServeTest, CountsItsRequests) {
     }
 }
 
-TEST_F(AdminServeTest, TellsAClientWithTooManyRequestsToWait) {
+TEST_F(AdminServeTest, AsksAClientWithTooManyRequestsToWait) {
     AdminInstance instance(service_);
     AdminClient client = instance.client("auditor");
     AdminAnswer last;
@@ -290,7 +290,7 @@ TEST_F(AdminServeTest, TellsAClientWithTooManyRequestsToWait) {
     EXPECT_EQ(instance.client("manager").get("/v1/records").status, 200);
 }
 
-TEST_F(AdminServeTest, RefusesWhatIsTooLargeAsAProblem) {
+TEST_F(AdminServeTest, RefusesTooLargeBodiesWithAProblemDocument) {
     AdminInstance instance(service_);
     AdminClient client = instance.client("ci.example");
     const AdminAnswer body = client.post(kTickets, std::string(1024 * 1024 + 1, ' '));
@@ -304,7 +304,7 @@ TEST_F(AdminServeTest, RefusesWhatIsTooLargeAsAProblem) {
     EXPECT_EQ(head.status, 431);
 }
 
-TEST_F(AdminServeTest, LosesNothingItAcknowledgedWhenTheDiskIsFull) {
+TEST_F(AdminServeTest, KeepsAcknowledgedChangesWhenTheDiskIsFull) {
     std::unique_ptr<AdminInstance> instance;
     {
         const auto size = std::filesystem::file_size(service_.path() + "/service/records.sqlite");
@@ -326,7 +326,7 @@ TEST_F(AdminServeTest, LosesNothingItAcknowledgedWhenTheDiskIsFull) {
     EXPECT_FALSE(acknowledged.empty());
 }
 
-TEST_F(AdminServeTest, IsThereIfServiceJsonSaysSo) {
+TEST_F(AdminServeTest, ListensIfServiceJsonHasTheSettings) {
     writeFile(service_.path() + "/service/service.json",
               R"({"hosts":["127.0.0.1"],"admin":{"listen":"127.0.0.1:0","clients":"clients/ca.pem"}})");
     pinwell::test::RunningProcess process({.executable = LUMORA_LOCAL,
@@ -335,7 +335,7 @@ TEST_F(AdminServeTest, IsThereIfServiceJsonSaysSo) {
     EXPECT_TRUE(process.waitForLine("administration at https://127.0.0.1:"));
 }
 
-TEST_F(AdminServeTest, IsNotThereUnlessItIsAskedFor) {
+TEST_F(AdminServeTest, DoesNotListenByDefault) {
     pinwell::test::RunningProcess process({.executable = LUMORA_LOCAL,
                                            .arguments = {"serve", service_.path(), "--listen", "127.0.0.1:0"},
                                            .environment = {{"PATH", "/usr/bin:/bin"}}});
@@ -361,37 +361,37 @@ class AdminStartTest : public AdminServeTest {
     }
 };
 
-TEST_F(AdminStartTest, NeedsBothOptions) {
+TEST_F(AdminStartTest, RequiresBothOptions) {
     expectRefused({"--admin-listen", "127.0.0.1:0"}, 64, "--admin-listen and --client-ca go together");
     expectRefused({"--client-ca", service_.authority()}, 64, "--admin-listen and --client-ca go together");
     expectRefused({"--admin-listen", "nowhere at all", "--client-ca", service_.authority()}, 64,
                   "ADDRESS:PORT");
 }
 
-TEST_F(AdminStartTest, NeedsAnAccessListThatCanBeUsed) {
+TEST_F(AdminStartTest, RequiresAUsableAccessList) {
     writeFile(service_.accessPath(), "[clients]\n\"a\" = \"read\"\n");
     expectRefused(both(service_.authority()), 78, "/service/access.toml:2: ");
     std::filesystem::remove(service_.accessPath());
     expectRefused(both(service_.authority()), 78, "/service/access.toml: ");
 }
 
-TEST_F(AdminStartTest, NeedsCertificatesOfAuthorities) {
+TEST_F(AdminStartTest, RequiresCertificatesOfAuthorities) {
     expectRefused(both(service_.folderOf("manager") + "/client.pem"), 78, "not an authority's: manager");
     expectRefused(both(service_.accessPath()), 78, "there is no certificate in");
     expectRefused(both(service_.scratch("nothing")), 66, "nothing");
 }
 
-TEST_F(AdminStartTest, NeedsAServiceThatMayChangeRecords) {
+TEST_F(AdminStartTest, RequiresAServiceThatMayChangeRecords) {
     writeFile(service_.path() + "/service/service.json", R"({"hosts":["127.0.0.1"],"role":"lookup"})");
     expectRefused(both(service_.authority()), 78, "\"role\" is lookup");
 }
 
-TEST_F(AdminStartTest, NeedsTheSigningKey) {
+TEST_F(AdminStartTest, RequiresTheSigningKey) {
     std::filesystem::remove(service_.path() + "/service/ticket-signer.key");
     expectRefused(both(service_.authority()), 66, "ticket-signer.key");
 }
 
-TEST_F(AdminStartTest, NeedsSettingsThatItKnows) {
+TEST_F(AdminStartTest, RefusesUnknownSettings) {
     const auto settings = [&](const std::string& admin) {
         writeFile(service_.path() + "/service/service.json",
                   R"({"hosts":["127.0.0.1"],"admin":)" + admin + "}");
@@ -406,7 +406,7 @@ TEST_F(AdminStartTest, NeedsSettingsThatItKnows) {
     expectRefused({}, 78, "unknown key \"admin.port\"");
 }
 
-TEST(ClientCertificate, IsRefusedForANameThatIsNone) {
+TEST(ClientCertificate, IsRefusedForAnInvalidName) {
     const pinwell::test::TemporaryDirectory directory;
     const std::string service = test::makeService(directory, "service");
     for (const std::string& name :
@@ -424,7 +424,7 @@ TEST(ClientCertificate, IsRefusedForANameThatIsNone) {
         66);
 }
 
-TEST(ClientCertificate, OverwritesNothingAndKeepsKeysToTheirOwner) {
+TEST(ClientCertificate, OverwritesNothingAndHasAPrivateKeyFile) {
     const pinwell::test::TemporaryDirectory directory;
     const std::string service = test::makeService(directory, "service");
     const auto make = [&] {

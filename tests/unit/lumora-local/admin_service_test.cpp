@@ -114,7 +114,7 @@ TEST_F(AdminServiceTest, HandsARequestToItsHandler) {
     EXPECT_TRUE(events().empty());
 }
 
-TEST_F(AdminServiceTest, LetsNobodyDoWhatItsRolesDoNotSay) {
+TEST_F(AdminServiceTest, RefusesRequestsWithoutTheRole) {
     EXPECT_EQ(statusOf(head("GET", "/things", "issuer")), 403);
     EXPECT_EQ(statusOf(head("POST", "/things", "reader")), 403);
     EXPECT_EQ(statusOf(head("GET", "/things", "stranger")), 403);
@@ -122,7 +122,7 @@ TEST_F(AdminServiceTest, LetsNobodyDoWhatItsRolesDoNotSay) {
     EXPECT_EQ(seen_, "");
 }
 
-TEST_F(AdminServiceTest, LooksAtTheRolesAgainOnceTheBodyIsThere) {
+TEST_F(AdminServiceTest, ChecksTheRolesAgainAfterTheBodyArrived) {
     const RequestHead post = head("POST", "/things", "issuer");
     EXPECT_EQ(statusOf(post), 0);
     pinwell::test::writeFile(directory_ / "access.toml", "");
@@ -145,7 +145,7 @@ TEST_F(AdminServiceTest, RefusesInTheFormOfThePath) {
     EXPECT_NE(headerOf(*answer, "Retry-After"), "");
 }
 
-TEST_F(AdminServiceTest, KnowsItsPathsAndMethods) {
+TEST_F(AdminServiceTest, RefusesUnknownPathsAndMethods) {
     int client = 0;
     for (const char* path : {"/", "/thing", "/things/", "/pages", "/v1/tickets", "//things"})
         EXPECT_EQ(statusOf(head("GET", path, "client " + std::to_string(++client))), 404) << path;
@@ -154,13 +154,13 @@ TEST_F(AdminServiceTest, KnowsItsPathsAndMethods) {
     EXPECT_EQ(headerOf(*answer, "Allow"), "GET, POST");
 }
 
-TEST_F(AdminServiceTest, RefusesQueriesThatItDoesNotKnow) {
+TEST_F(AdminServiceTest, RefusesUnknownQueries) {
     EXPECT_EQ(statusOf(head("GET", "/things?c=1", "reader")), 400);
     EXPECT_EQ(statusOf(head("GET", "/things?a=%", "reader")), 400);
     EXPECT_EQ(statusOf(head("POST", "/things?a=1", "issuer")), 400);
 }
 
-TEST_F(AdminServiceTest, TakesJsonAlone) {
+TEST_F(AdminServiceTest, AcceptsOnlyJson) {
     RequestHead post = head("POST", "/things", "issuer");
     post.contentType = "text/plain";
     EXPECT_EQ(statusOf(post), 415);
@@ -170,13 +170,13 @@ TEST_F(AdminServiceTest, TakesJsonAlone) {
     EXPECT_EQ(statusOf(post), 415);
 }
 
-TEST_F(AdminServiceTest, RefusesAKeyThatIsNone) {
+TEST_F(AdminServiceTest, RefusesAnInvalidKey) {
     RequestHead post = head("POST", "/things", "issuer");
     post.idempotencyKey = "a, b";
     EXPECT_EQ(statusOf(post), 400);
 }
 
-TEST_F(AdminServiceTest, HoldsEachClientToItsRate) {
+TEST_F(AdminServiceTest, LimitsTheRateOfEachClient) {
     for (int i = 0; i < 5; ++i) EXPECT_EQ(statusOf(head("GET", "/things", "reader")), 200);
     const auto answer = service_->answerHead(head("GET", "/things", "reader"));
     EXPECT_EQ(answer->status, 429);
@@ -186,7 +186,7 @@ TEST_F(AdminServiceTest, HoldsEachClientToItsRate) {
     EXPECT_EQ(statusOf(head("GET", "/things", "reader")), 200);
 }
 
-TEST_F(AdminServiceTest, CountsNoBodyAsAnotherRequest) {
+TEST_F(AdminServiceTest, CountsHeadAndBodyAsOneRequest) {
     const RequestHead post = head("POST", "/things", "issuer");
     for (int i = 0; i < 5; ++i) {
         EXPECT_EQ(statusOf(post), 0);
@@ -195,12 +195,12 @@ TEST_F(AdminServiceTest, CountsNoBodyAsAnotherRequest) {
     EXPECT_EQ(statusOf(post), 429);
 }
 
-TEST_F(AdminServiceTest, KeepsItsAnswersOutOfCaches) {
+TEST_F(AdminServiceTest, ForbidsCachingOfItsResponses) {
     EXPECT_EQ(headerOf(*service_->answerHead(head("GET", "/things", "reader")), "Cache-Control"), "no-store");
     EXPECT_EQ(headerOf(*service_->answerHead(head("GET", "/x", "reader")), "Cache-Control"), "no-store");
 }
 
-TEST_F(AdminServiceTest, LetsAFailureThroughAndTellsWhenToTryAgain) {
+TEST_F(AdminServiceTest, PassesFailuresOnAndStatesWhenToTryAgain) {
     EXPECT_THROW(static_cast<void>(service_->answerHead(head("GET", "/failing", "reader"))), Failure);
     const Answer answer = service_->refuseForNow("the disk is gone");
     EXPECT_EQ(answer.status, 503);
@@ -209,7 +209,7 @@ TEST_F(AdminServiceTest, LetsAFailureThroughAndTellsWhenToTryAgain) {
     expectProblem(answer);
 }
 
-TEST_F(AdminServiceTest, NotesRefusedAttemptsToChangeSomething) {
+TEST_F(AdminServiceTest, LogsRefusedAttemptsToChangeRecords) {
     const std::string name = "2/2/" + std::string(40, 'a');
     statusOf(head("POST", "/things", "reader"));
     const RequestHead post = head("POST", "/things", "issuer");
@@ -226,7 +226,7 @@ TEST_F(AdminServiceTest, NotesRefusedAttemptsToChangeSomething) {
     EXPECT_EQ(all[2].comment, "413 Content Too Large: POST /things: the body has more than 1 MiB");
 }
 
-TEST_F(AdminServiceTest, NotesNothingElse) {
+TEST_F(AdminServiceTest, LogsNoOtherRefusals) {
     statusOf(head("GET", "/things", "stranger"));
     statusOf(head("POST", "/nothing", "stranger"));
     statusOf(head("DELETE", "/things", "reader"));
@@ -251,7 +251,7 @@ TEST_F(AdminServiceTest, BoundsTheEventsOfAllClients) {
     EXPECT_EQ(events().size(), 100U);
 }
 
-TEST_F(AdminServiceTest, RefusesAlsoWhatItCannotNote) {
+TEST_F(AdminServiceTest, RefusesEvenIfTheRefusalCannotBeLogged) {
     store_.reset();
     SqliteStore broken(directory_ / "records.sqlite", [](StoreUse) { throw Failure(EX_IOERR, "no store"); });
     RefusalLog refusals(broken, [this](std::string_view line) { errors_ += line; });
@@ -275,7 +275,7 @@ TEST_F(AdminServiceTest, ShowsLabelsInAnyEncoding) {
     }
 }
 
-TEST(RecordSearchOf, TakesItsParameters) {
+TEST(RecordSearchOf, AcceptsItsParameters) {
     const RecordSearch search = recordSearchOf(
         {{"label", "Example"}, {"environment", "development"}, {"limit", "7"}, {"after", "4578:2/2/ab"}});
     EXPECT_EQ(search.label, "Example");
@@ -286,7 +286,7 @@ TEST(RecordSearchOf, TakesItsParameters) {
     EXPECT_EQ(recordSearchOf({}).limit, kDefaultPage);
 }
 
-TEST(RecordSearchOf, TakesAHashByItsDigitsOrByName) {
+TEST(RecordSearchOf, AcceptsAHashByItsDigitsOrByName) {
     const std::string hex(40, 'a');
     const foundation::Data hash(20, std::byte{0xAA});
     EXPECT_EQ(recordSearchOf({{"hash", hex}}).hash, hash);
@@ -295,7 +295,7 @@ TEST(RecordSearchOf, TakesAHashByItsDigitsOrByName) {
     EXPECT_EQ(recordSearchOf({{"hash", std::string(96, 'a')}}).hash, foundation::Data(48, std::byte{0xAA}));
 }
 
-TEST(RecordSearchOf, RefusesWhatIsOutOfBounds) {
+TEST(RecordSearchOf, RefusesParametersOutOfBounds) {
     for (const Query& query : std::initializer_list<Query>{{{"name", ""}},
                                                            {{"name", std::string(256, 'x')}},
                                                            {{"name", "a b"}},
@@ -320,7 +320,7 @@ TEST(RecordSearchOf, RefusesWhatIsOutOfBounds) {
     }
 }
 
-TEST(EventSearchOf, TakesItsParameters) {
+TEST(EventSearchOf, AcceptsItsParameters) {
     const EventSearch search = eventSearchOf({{"record", "2/2/ab"},
                                               {"since", "1970-01-01T00:01:40Z"},
                                               {"environment", "development"},
@@ -332,7 +332,7 @@ TEST(EventSearchOf, TakesItsParameters) {
     EXPECT_EQ(toString(*search.after), "-5:7");
 }
 
-TEST(EventSearchOf, RefusesWhatIsOutOfBounds) {
+TEST(EventSearchOf, RefusesParametersOutOfBounds) {
     for (const Query& query : std::initializer_list<Query>{{{"since", "yesterday"}},
                                                            {{"since", ""}},
                                                            {{"environment", "production"}},

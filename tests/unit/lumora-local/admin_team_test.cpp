@@ -42,7 +42,7 @@ class AdminTeamTest : public testing::Test {
     PostgresPlace place_;
 };
 
-TEST_F(AdminTeamTest, GivesARepeatedRequestTheAnswerOfTheOtherInstance) {
+TEST_F(AdminTeamTest, ReturnsTheOtherInstancesResponseToARepeatedRequest) {
     AdminInstance first(service_);
     AdminInstance second(service_);
     const AdminAnswer issued = first.client("ci.example").post(kTicketsPath, bodyFor(recordNamed(1)), "one");
@@ -56,7 +56,7 @@ TEST_F(AdminTeamTest, GivesARepeatedRequestTheAnswerOfTheOtherInstance) {
     EXPECT_EQ(verifyHistory(store, std::nullopt).events, 2U);
 }
 
-TEST_F(AdminTeamTest, CarriesARequestOutOnceThatIsSentToBothAtATime) {
+TEST_F(AdminTeamTest, CarriesOutOnceARequestThatIsSentToBothInstances) {
     AdminInstance first(service_);
     AdminInstance second(service_);
     std::vector<std::string> bodies(2);
@@ -77,7 +77,7 @@ TEST_F(AdminTeamTest, CarriesARequestOutOnceThatIsSentToBothAtATime) {
     EXPECT_EQ(verifyHistory(store, std::nullopt).events, 10U);
 }
 
-TEST_F(AdminTeamTest, LosesNothingItAcknowledgedWhenTheDatabaseIsKilled) {
+TEST_F(AdminTeamTest, KeepsAcknowledgedChangesWhenTheDatabaseIsKilled) {
     constexpr int kRequests = 40;
     AdminInstance instance(service_);
     std::atomic<int> acknowledged{0};

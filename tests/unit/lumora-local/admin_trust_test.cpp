@@ -58,17 +58,17 @@ class AdminTrustTest : public testing::Test {
     std::unique_ptr<AdminInstance> instance_;
 };
 
-TEST_F(AdminTrustTest, LetsInACertificateOfTheAuthority) {
+TEST_F(AdminTrustTest, AcceptsACertificateOfTheAuthority) {
     EXPECT_EQ(statusFor(issued(client())), 200);
 }
 
-TEST_F(AdminTrustTest, LetsInARsaKeyOfOrdinarySize) {
+TEST_F(AdminTrustTest, AcceptsAnRsaKeyOfOrdinarySize) {
     CertificateProfile profile = client();
     profile.keyKind = KeyKind::rsa2048;
     EXPECT_EQ(statusFor(issued(profile)), 200);
 }
 
-TEST_F(AdminTrustTest, LetsInAChainOverAnIntermediate) {
+TEST_F(AdminTrustTest, AcceptsAChainOverAnIntermediate) {
     const IssuedCertificate intermediate = issued(authority("Builders"));
     const IssuedCertificate shown = issueCertificate(client(), &intermediate, Date::now());
     EXPECT_EQ(statusFor(shown), -1);
@@ -84,7 +84,7 @@ TEST_F(AdminTrustTest, LetsInAChainOverAnIntermediate) {
     EXPECT_EQ(answer.output, R"({"next":null,"records":[]})") << answer.errors;
 }
 
-TEST_F(AdminTrustTest, TrustsAnIntermediateThatTheFileNamesAlone) {
+TEST_F(AdminTrustTest, TrustsAnIntermediateWithoutItsRoot) {
     const IssuedCertificate intermediate = issued(authority("Builders"));
     instance_.reset();
     writeFile(authorities_, encodeCertificate(intermediate.certificate.get()));
@@ -93,14 +93,14 @@ TEST_F(AdminTrustTest, TrustsAnIntermediateThatTheFileNamesAlone) {
     EXPECT_EQ(statusFor(issued(client())), -1);
 }
 
-TEST_F(AdminTrustTest, KeepsOutWhoShowsNoCertificate) {
+TEST_F(AdminTrustTest, RefusesClientsWithoutACertificate) {
     EXPECT_EQ(test::healthOf(service_.path(), instance_->adminPort()), -1);
     EXPECT_EQ(test::healthOf(service_.path(), instance_->port()), 200);
     const auto end = instance_->stop();
     EXPECT_NE(end.errors.find(": no connection: "), std::string::npos) << end.errors;
 }
 
-TEST_F(AdminTrustTest, KeepsOutCertificatesOfOtherAuthorities) {
+TEST_F(AdminTrustTest, RefusesCertificatesOfOtherAuthorities) {
     const IssuedCertificate other = issueCertificate(authority(), nullptr, Date::now());
     EXPECT_EQ(statusFor(issueCertificate(client(), &other, Date::now())), -1);
     EXPECT_EQ(statusFor(issueCertificate(client(), &other, Date::now()), {&other}), -1);
@@ -109,12 +109,12 @@ TEST_F(AdminTrustTest, KeepsOutCertificatesOfOtherAuthorities) {
     EXPECT_EQ(instance_->client("auditor").get("/v1/records").status, -1);
 }
 
-TEST_F(AdminTrustTest, KeepsOutCertificatesThatAreNotValidNow) {
+TEST_F(AdminTrustTest, RefusesCertificatesThatAreNotValidNow) {
     EXPECT_EQ(statusFor(issueCertificate(client(), &root_, Date{Date::now().seconds - 11 * kYear})), -1);
     EXPECT_EQ(statusFor(issueCertificate(client(), &root_, Date{Date::now().seconds + kYear})), -1);
 }
 
-TEST_F(AdminTrustTest, KeepsOutCertificatesForOtherPurposes) {
+TEST_F(AdminTrustTest, RefusesCertificatesForOtherPurposes) {
     CertificateProfile profile = client();
     profile.extendedKeyUsage = "serverAuth";
     EXPECT_EQ(statusFor(issued(profile)), -1);
@@ -124,17 +124,17 @@ TEST_F(AdminTrustTest, KeepsOutCertificatesForOtherPurposes) {
     EXPECT_EQ(statusFor(issued(profile)), 200);
 }
 
-TEST_F(AdminTrustTest, KeepsOutAClientThatActsAsAnAuthority) {
+TEST_F(AdminTrustTest, RefusesCertificatesThatAClientIssued) {
     const IssuedCertificate plain = issued(client());
     EXPECT_EQ(statusFor(issueCertificate(client("manager"), &plain, Date::now()), {&plain}), -1);
 }
 
-TEST_F(AdminTrustTest, KeepsOutNamesWithControlCharacters) {
+TEST_F(AdminTrustTest, RefusesNamesWithControlCharacters) {
     EXPECT_EQ(statusFor(issued(client("auditor\n"))), -1);
     EXPECT_EQ(statusFor(issued(client("a\x1b[2J"))), -1);
 }
 
-TEST_F(AdminTrustTest, TakesANameAsItIs) {
+TEST_F(AdminTrustTest, UsesTheNameUnchanged) {
     EXPECT_EQ(statusFor(issued(client("Auditor"))), 403);
     EXPECT_EQ(statusFor(issued(client("auditor "))), 403);
     EXPECT_EQ(statusFor(issued(client("R\u00fcdiger"))), 403);

@@ -24,7 +24,7 @@ std::shared_ptr<const KeptAnswer> kept(const std::string& contents) {
 
 constexpr Environment kProduction = Environment::production;
 
-TEST(AnswerCache, ReturnsWhatItWasGivenForTheSameState) {
+TEST(AnswerCache, ReturnsItsEntriesForTheSameState) {
     AnswerCache cache;
     cache.insert(7, kProduction, "name", kept("record"));
     ASSERT_NE(cache.find(7, kProduction, "name"), nullptr);
@@ -33,7 +33,7 @@ TEST(AnswerCache, ReturnsWhatItWasGivenForTheSameState) {
     EXPECT_EQ(cache.find(7, kProduction, "other"), nullptr);
 }
 
-TEST(AnswerCache, ForgetsEverythingInALaterState) {
+TEST(AnswerCache, IsEmptyInALaterState) {
     AnswerCache cache;
     cache.insert(7, kProduction, "name", kept("record"));
     EXPECT_EQ(cache.find(8, kProduction, "name"), nullptr);
@@ -41,7 +41,7 @@ TEST(AnswerCache, ForgetsEverythingInALaterState) {
     EXPECT_EQ(cache.bytes(), 0U);
 }
 
-TEST(AnswerCache, TakesNothingThatWasReadBeforeAChange) {
+TEST(AnswerCache, RefusesEntriesReadBeforeAChange) {
     AnswerCache cache;
     EXPECT_EQ(cache.find(8, kProduction, "name"), nullptr);
     cache.insert(7, kProduction, "name", kept("of an earlier state"));
@@ -51,7 +51,7 @@ TEST(AnswerCache, TakesNothingThatWasReadBeforeAChange) {
     EXPECT_EQ(cache.find(8, kProduction, "name")->text, "now");
 }
 
-TEST(AnswerCache, HoldsAsManyEntriesAsItMay) {
+TEST(AnswerCache, IsBoundedInEntries) {
     AnswerCache cache({.entries = 3, .bytes = 1'000'000});
     for (const char* name : {"a", "b", "c"}) cache.insert(1, kProduction, name, kept("x"));
     cache.find(1, kProduction, "a");
@@ -61,7 +61,7 @@ TEST(AnswerCache, HoldsAsManyEntriesAsItMay) {
     EXPECT_NE(cache.find(1, kProduction, "a"), nullptr);
 }
 
-TEST(AnswerCache, HoldsAsManyBytesAsItMay) {
+TEST(AnswerCache, IsBoundedInBytes) {
     AnswerCache cache({.entries = 1'000'000, .bytes = 10'000});
     for (int i = 0; i < 1000; ++i) {
         cache.insert(1, kProduction, std::to_string(i), kept(std::string(90, 'x')));
@@ -106,7 +106,7 @@ class CachedLookups : public testing::Test {
     const std::string path_ = directory_ / "records";
 };
 
-TEST_F(CachedLookups, SeeWhatAnotherConnectionChanges) {
+TEST_F(CachedLookups, SeeChangesOfOtherConnections) {
     SqliteStore serving(path_);
     SqliteStore other(path_);
     const LookupService lookups(serving, {"localhost"}, {"localhost", 8443});
@@ -119,7 +119,7 @@ TEST_F(CachedLookups, SeeWhatAnotherConnectionChanges) {
     }
 }
 
-TEST_F(CachedLookups, NeverReturnAStateOlderThanOneThatWasAcknowledged) {
+TEST_F(CachedLookups, NeverReturnAStateOlderThanAnAcknowledgedChange) {
     SqliteStore serving(path_);
     const LookupService lookups(serving, {"localhost"}, {"localhost", 8443});
     const std::string name = record(1, 0).record.name;
@@ -149,7 +149,7 @@ TEST_F(CachedLookups, NeverReturnAStateOlderThanOneThatWasAcknowledged) {
     EXPECT_GT(answers, 0);
 }
 
-TEST_F(CachedLookups, TellTheSameStateAsLongAsNothingChanges) {
+TEST_F(CachedLookups, KeepTheStateNumberWithoutChanges) {
     SqliteStore serving(path_);
     SqliteStore other(path_);
     const auto first = serving.changeCounter();

@@ -73,7 +73,7 @@ TEST_F(AuthorityTest, MarksEachCertificateForItsUseAndNoOther) {
     }
 }
 
-TEST_F(AuthorityTest, LeavesNoCriticalExtensionThatAVerifierMightNotKnow) {
+TEST_F(AuthorityTest, HasOnlyStandardCriticalExtensions) {
     for (X509* certificate : all_) {
         for (int i = 0; i < X509_get_ext_count(certificate); ++i) {
             X509_EXTENSION* extension = X509_get_ext(certificate, i);
@@ -93,7 +93,7 @@ TEST_F(AuthorityTest, UsesP256KeysAndSha256) {
     }
 }
 
-TEST_F(AuthorityTest, HandsOutTheKeyOfEachCertificate) {
+TEST_F(AuthorityTest, ReturnsTheKeyOfEachCertificate) {
     for (const Identity* identity :
          {&authority_.root, &authority_.ticketIntermediate, &authority_.ticketSigner, &authority_.server}) {
         const test::Key key = keyFromPem(identity->privateKey);
@@ -136,7 +136,7 @@ TEST_F(AuthorityTest, NamesEverySubjectAndNumbersEveryCertificate) {
     EXPECT_EQ(serialNumbers.size(), all_.size());
 }
 
-TEST_F(AuthorityTest, LetsTheServerSpeakForItsHostsAlone) {
+TEST_F(AuthorityTest, NamesOnlyTheHostsInTheServerCertificate) {
     EXPECT_EQ(
         X509_check_host(server_.get(), "tickets.example", 0, X509_CHECK_FLAG_NEVER_CHECK_SUBJECT, nullptr),
         1);
@@ -146,7 +146,7 @@ TEST_F(AuthorityTest, LetsTheServerSpeakForItsHostsAlone) {
     EXPECT_EQ(X509_check_ip_asc(server_.get(), "127.0.0.2", 0), 0);
 }
 
-TEST(Authority, CopesWithTheLongestHostName) {
+TEST(Authority, AcceptsTheLongestHostName) {
     std::string longest;
     for (int i = 0; i < 126; ++i) longest += "a.";
     longest += "a";
@@ -155,7 +155,7 @@ TEST(Authority, CopesWithTheLongestHostName) {
     EXPECT_EQ(X509_check_host(server.get(), longest.c_str(), longest.size(), 0, nullptr), 1);
 }
 
-TEST(Authority, IsNeverTheSameTwice) {
+TEST(Authority, IsDifferentEachTime) {
     const std::vector<std::string> hosts{"localhost"};
     EXPECT_NE(createAuthority(hosts, kNow).root.privateKey, createAuthority(hosts, kNow).root.privateKey);
 }

@@ -39,7 +39,7 @@ TEST_F(CommandLine, ShowsHelpAndVersion) {
     EXPECT_TRUE(version.out.starts_with("lumora-local ")) << version.out;
 }
 
-TEST_F(CommandLine, RefusesWhatItDoesNotUnderstand) {
+TEST_F(CommandLine, RefusesUnknownWords) {
     for (const std::vector<std::string>& arguments : {std::vector<std::string>{},
                                                       {"dance"},
                                                       {"init"},
@@ -64,7 +64,7 @@ TEST_F(CommandLine, RefusesWhatItDoesNotUnderstand) {
     EXPECT_FALSE(std::filesystem::exists(service_));
 }
 
-TEST_F(CommandLine, NamesTheNearestThatExists) {
+TEST_F(CommandLine, SuggestsTheNearestCommandOrOption) {
     EXPECT_EQ(runProgram({"isue", service_}).err,
               "lumora-local: unknown command isue; did you mean issue?\n");
     EXPECT_EQ(runProgram({"issue", service_, "a", "--asett"}).err,
@@ -73,13 +73,13 @@ TEST_F(CommandLine, NamesTheNearestThatExists) {
     EXPECT_EQ(runProgram({"list", service_, "more"}).err, "lumora-local: unexpected argument more\n");
 }
 
-TEST_F(CommandLine, EscapesWhatItRepeats) {
+TEST_F(CommandLine, EscapesRepeatedInput) {
     const Outcome outcome = runProgram({"init", service_, "--host", "a\x1b[31m\nb"});
     expectFailure(outcome, 64);
     EXPECT_EQ(outcome.err.find('\x1b'), std::string::npos);
 }
 
-TEST_F(CommandLine, MakesAServiceOnce) {
+TEST_F(CommandLine, RefusesToMakeAServiceTwice) {
     const Outcome made =
         runProgram({"init", service_, "--host", "tickets.example", "--host", "::1", "--port", "99"});
     EXPECT_EQ(made.exitStatus, 0) << made.err;
@@ -102,7 +102,7 @@ class RecordCommands : public CommandLine {
     const std::string record_ = "2/2/00112233445566778899aabbccddeeff00112233";
 };
 
-TEST_F(RecordCommands, IssueForAnArtefactThatIsNotHere) {
+TEST_F(RecordCommands, IssueForARemoteArtefact) {
     const Outcome issued = issueRecord({"--json"});
     ASSERT_EQ(issued.exitStatus, 0) << issued.err;
     const auto document = foundation::parseJSON(foundation::asBytes(issued.out));
@@ -111,7 +111,7 @@ TEST_F(RecordCommands, IssueForAnArtefactThatIsNotHere) {
     EXPECT_EQ(*(*document)["records"][0]["label"].string(), "huge.dmg");
 }
 
-TEST_F(RecordCommands, DoNotMakeRevokedSoftwareValidAgainUnasked) {
+TEST_F(RecordCommands, DoNotReinstateByDefault) {
     issueRecord();
     EXPECT_EQ(runProgram({"revoke", service_, record_, "--reason", "compromised"}).exitStatus, 0);
     const Outcome refused = issueRecord();
@@ -147,14 +147,14 @@ TEST_F(RecordCommands, FindTheServiceInTheEnvironment) {
     EXPECT_EQ(runProgram({"revoke", service_, record_}).exitStatus, 0);
 }
 
-TEST_F(CommandLine, NeedsAServiceToWorkOn) {
+TEST_F(CommandLine, RequiresAService) {
     expectFailure(runProgram({"list", service_}), 66);
     expectFailure(runProgram({"serve", service_}), 66);
     expectFailure(runProgram({"issue", service_, "a"}), 66);
     expectFailure(runProgram({"revoke", service_, "a"}), 66);
 }
 
-TEST_F(CommandLine, SaysWhatCannotBeIssued) {
+TEST_F(CommandLine, NamesArtefactsThatCannotBeIssued) {
     ASSERT_EQ(runProgram({"init", service_}).exitStatus, 0);
     writeFile(directory_ / "notes.txt", "nothing to sign");
     expectFailure(runProgram({"issue", service_, directory_ / "missing.app"}), 66);

@@ -111,7 +111,7 @@ TEST_F(CommandsTest, DeliversAsAnAssetOnRequest) {
     EXPECT_TRUE(store_.findTicket(Environment::production, nameOfA_)->asset);
 }
 
-TEST_F(CommandsTest, DeliversLargeTicketsAsAssetsUnasked) {
+TEST_F(CommandsTest, DeliversLargeTicketsAsAssetsByDefault) {
     std::vector<CodeHash> many;
     for (std::uint32_t i = 0; i < 50'000; ++i) {
         CodeHash hash = hashOf(2, 0);
@@ -178,7 +178,7 @@ TEST_F(CommandsTest, ReinstatesARevokedArtefactOnRequest) {
     EXPECT_EQ(deliveredFlags(nameOfA_), 0U);
 }
 
-TEST_F(CommandsTest, IssuesForARecordWithoutItsArtefact) {
+TEST_F(CommandsTest, IssuesForARecordByName) {
     IssueRequest request;
     request.recordNames = {nameOfB_};
     request.label = "huge.dmg";
@@ -189,13 +189,13 @@ TEST_F(CommandsTest, IssuesForARecordWithoutItsArtefact) {
     EXPECT_EQ(deliveredFlags(nameOfB_), 0U);
 }
 
-TEST_F(CommandsTest, RefusesARecordNameThatIsNone) {
+TEST_F(CommandsTest, RefusesAnInvalidRecordName) {
     IssueRequest request;
     request.recordNames = {"2/2/AB"};
     EXPECT_EQ(exitStatusOf([&] { issue(registry_, request); }), EX_USAGE);
 }
 
-TEST_F(CommandsTest, LogsWhoRevokedAndWhy) {
+TEST_F(CommandsTest, LogsActorAndReasonOfARevocation) {
     issue(registry_, artefacts({"A.app"}));
     revoke(registry_, {{"A.app"}, Reason::superseded, "2.0 is out"});
     std::vector<Event> events;

@@ -5,16 +5,16 @@
 namespace pinwell::lumora {
 namespace {
 
-TEST(CanonicalHost, LowersTheCaseOfNames) {
+TEST(CanonicalHost, LowercasesNames) {
     EXPECT_EQ(canonicalHost("Tickets.Example"), "tickets.example");
 }
 
-TEST(CanonicalHost, WritesAddressesInOneWay) {
+TEST(CanonicalHost, WritesAddressesInCanonicalForm) {
     EXPECT_EQ(canonicalHost("192.0.2.1"), "192.0.2.1");
     EXPECT_EQ(canonicalHost("2001:DB8:0:0::1"), "2001:db8::1");
 }
 
-TEST(CanonicalHost, RefusesWhatIsNeitherNameNorAddress) {
+TEST(CanonicalHost, RefusesOtherTexts) {
     for (const std::string& text :
          {std::string(), std::string("a..b"), std::string(".a"), std::string("a."), std::string("-a"),
           std::string("a-"), std::string("a_b"), std::string("a b"), std::string("a,IP:1.2.3.4"),
@@ -25,7 +25,7 @@ TEST(CanonicalHost, RefusesWhatIsNeitherNameNorAddress) {
     }
 }
 
-TEST(CanonicalHost, HoldsNamesToTheirLength) {
+TEST(CanonicalHost, RefusesTooLongNames) {
     std::string longest;
     for (int i = 0; i < 126; ++i) longest += "a.";
     longest += "a";

@@ -59,19 +59,19 @@ TEST(EventHash, ChangesWithEveryField) {
     });
 }
 
-TEST(Event, IsALineForPeople) {
+TEST(Event, IsOneLineAsText) {
     EXPECT_EQ(describeEvent(revocation()),
               "2026-11-18T11:06:40Z\trevoked\t2/2/00\talice\tA.app\tcompromised\tkey lost\n");
 }
 
-TEST(Event, KeepsControlCharactersFromTheTerminal) {
+TEST(Event, EscapesControlCharacters) {
     Event event = revocation();
     event.comment = "one\ntwo\x1B[31m";
     EXPECT_EQ(describeEvent(event).find('\x1B'), std::string::npos);
     EXPECT_EQ(describeEvent(event).find('\n'), describeEvent(event).size() - 1);
 }
 
-TEST(Event, IsAnObjectForPrograms) {
+TEST(Event, IsOneObjectAsJson) {
     const auto object = nlohmann::json::parse(eventAsJson(revocation()));
     EXPECT_EQ(object.size(), 10U);
     EXPECT_EQ(object["time"], "2026-11-18T11:06:40Z");
@@ -101,7 +101,7 @@ TEST(Event, NamesAnEnvironmentOtherThanProduction) {
     EXPECT_EQ(nlohmann::json::parse(eventAsJson(event))["environment"], "development");
 }
 
-TEST(Event, HasNamesThatReadBack) {
+TEST(Event, HasNamesThatCanBeParsed) {
     for (const std::string& name : reasonNames()) EXPECT_EQ(toString(parseReason(name).value()), name);
     for (const Action action : {Action::issued, Action::reissued, Action::revoked, Action::reinstated}) {
         EXPECT_EQ(parseAction(toString(action)), action);

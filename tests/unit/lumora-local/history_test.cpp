@@ -57,14 +57,14 @@ class HistoryTest : public testing::Test {
     const std::string path_ = directory_ / "records.sqlite";
 };
 
-TEST_F(HistoryTest, IsWholeWhenNobodyTouchedIt) {
+TEST_F(HistoryTest, AcceptsAnUnchangedLog) {
     SqliteStore store(path_);
     const HistorySummary summary = verifyHistory(store, store.headHash());
     EXPECT_EQ(summary.events, 4U);
     EXPECT_EQ(summary.head, store.headHash());
 }
 
-TEST_F(HistoryTest, ShowsAChangedEvent) {
+TEST_F(HistoryTest, DetectsAChangedEvent) {
     for (const char* change :
          {"comment = 'x'", "time = 78", "actor = 'x'", "action = 'reissued'", "label = 'x'",
           "reason = 'withdrawn'", "ticket = 'x'", "environment = 'development'"}) {
@@ -73,25 +73,25 @@ TEST_F(HistoryTest, ShowsAChangedEvent) {
     }
 }
 
-TEST_F(HistoryTest, ShowsARemovedEvent) {
+TEST_F(HistoryTest, DetectsARemovedEvent) {
     tamper("DELETE FROM event WHERE position = 2");
     EXPECT_NE(complaint().find("event 2 "), std::string::npos) << complaint();
     EXPECT_NE(complaint().find("does not follow"), std::string::npos) << complaint();
 }
 
-TEST_F(HistoryTest, ShowsEventsInAnotherOrder) {
+TEST_F(HistoryTest, DetectsEventsInAnotherOrder) {
     tamper("UPDATE event SET position = position + 10 WHERE position = 1");
     EXPECT_NE(complaint().find("event 1 "), std::string::npos) << complaint();
 }
 
-TEST_F(HistoryTest, ShowsACutEndToWhoKnowsTheHead) {
+TEST_F(HistoryTest, DetectsACutEndByAKnownHead) {
     const std::string head = SqliteStore(path_).headHash();
     tamper("DELETE FROM event WHERE position = 4; DELETE FROM record WHERE name = 'b'");
     EXPECT_EQ(complaint(), "");
     EXPECT_NE(complaint(head).find(head), std::string::npos);
 }
 
-TEST_F(HistoryTest, KnowsEveryEarlierHead) {
+TEST_F(HistoryTest, AcceptsEveryEarlierHead) {
     SqliteStore store(path_);
     const std::string head = store.headHash();
     put(store, "d", false);
@@ -99,27 +99,27 @@ TEST_F(HistoryTest, KnowsEveryEarlierHead) {
     EXPECT_EQ(complaint(hashBeforeTheFirstEvent()), "");
 }
 
-TEST_F(HistoryTest, ShowsARecordThatTheLogDoesNotExplain) {
+TEST_F(HistoryTest, DetectsARecordWithAnotherTicketThanItsEvent) {
     tamper("UPDATE record SET ticket = x'00' WHERE name = 'a'");
     EXPECT_NE(complaint().find("record a "), std::string::npos) << complaint();
 }
 
-TEST_F(HistoryTest, ShowsARevokedRecordThatWasMadeValid) {
+TEST_F(HistoryTest, DetectsARevokedRecordThatWasMadeValid) {
     tamper("UPDATE record SET revoked = 0 WHERE name = 'b'");
     EXPECT_NE(complaint().find("record b "), std::string::npos) << complaint();
 }
 
-TEST_F(HistoryTest, ShowsARecordWithoutAnEvent) {
+TEST_F(HistoryTest, DetectsARecordWithoutAnEvent) {
     tamper("INSERT INTO record VALUES ('production', 'z', 'z', 0, 0, NULL, x'00')");
     EXPECT_NE(complaint().find("record z "), std::string::npos) << complaint();
 }
 
-TEST_F(HistoryTest, NamesAnActionThatIsNone) {
+TEST_F(HistoryTest, NamesAnUnknownAction) {
     tamper("UPDATE event SET action = 'blessed' WHERE position = 1");
     EXPECT_NE(complaint().find("blessed"), std::string::npos);
 }
 
-TEST_F(HistoryTest, IsOneDocumentForPrograms) {
+TEST_F(HistoryTest, IsOneDocumentAsJson) {
     SqliteStore store(path_);
     std::string text;
     writeEvents(store, {}, true, [&](std::string_view part) { text += part; });
@@ -129,7 +129,7 @@ TEST_F(HistoryTest, IsOneDocumentForPrograms) {
     EXPECT_EQ(document["events"][3]["previous"], document["events"][2]["hash"]);
 }
 
-TEST_F(HistoryTest, IsOneDocumentWithoutEvents) {
+TEST_F(HistoryTest, IsOneJsonDocumentWithoutEvents) {
     SqliteStore store(path_);
     std::string text;
     writeEvents(store, {"nobody", std::nullopt}, true, [&](std::string_view part) { text += part; });

@@ -59,7 +59,7 @@ TEST_F(HostileClient, LeavesInTheMiddleOfTheHead) {
     client.drop();
 }
 
-TEST_F(HostileClient, SpeaksNoTls) {
+TEST_F(HostileClient, SendsNoTls) {
     httplib::Client client("127.0.0.1", service_.port());
     EXPECT_FALSE(client.Get("/healthz"));
 }
@@ -90,7 +90,7 @@ TEST_F(HostileClient, SendsAnOverlongTarget) {
                   414);
 }
 
-TEST_F(HostileClient, SendsWhatIsNoHttp) {
+TEST_F(HostileClient, SendsNoHttp) {
     for (const char* bytes : {"\r\n\r\n", "GET\r\n\r\n", "GET / HTTP/9.9\r\n\r\n", "FETCH / HTTP/1.1\r\n\r\n",
                               "\x16\x03\x01\r\n\r\n"}) {
         expectRefusal(answerTo(bytes), 400);
@@ -179,19 +179,19 @@ TEST_F(HostileClient, SendsSeveralRequestsAtOnce) {
     EXPECT_NE(third, std::string::npos);
 }
 
-TEST_F(HostileClient, NestsDeeply) {
+TEST_F(HostileClient, SendsDeeplyNestedJson) {
     const std::string body(500'000, '[');
     const auto result = service_.client()->Post(kLookupPath, body, "application/json");
     ASSERT_TRUE(result);
     EXPECT_EQ(result->status, 400);
 }
 
-TEST_F(HostileClient, OpensManyConnectionsAndSaysNothing) {
+TEST_F(HostileClient, OpensManySilentConnections) {
     std::vector<std::unique_ptr<RawClient>> clients;
     for (int i = 0; i < 12; ++i) clients.push_back(std::make_unique<RawClient>(service_));
 }
 
-TEST_F(HostileClient, ForgetsToReadItsAnswers) {
+TEST_F(HostileClient, DoesNotReadItsResponses) {
     RawClient client(service_);
     for (int i = 0; i < 50; ++i) client.send("GET /healthz HTTP/1.1\r\nHost: x\r\n\r\n");
     client.drop();

@@ -25,7 +25,7 @@ TEST(Query, IsRefusedIfItIsMalformed) {
     }
 }
 
-TEST(Query, GoesThroughEncodingAndBack) {
+TEST(Query, RoundTripsThroughEncoding) {
     std::string all;
     for (int c = 0; c < 256; ++c) all += static_cast<char>(c);
     const std::string encoded = percentEncoded(all);

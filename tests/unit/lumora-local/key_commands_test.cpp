@@ -36,7 +36,7 @@ class KeyCommands : public testing::Test {
     const std::string service_ = directory_ / "service";
 };
 
-TEST_F(KeyCommands, RefuseWhatTheyDoNotUnderstand) {
+TEST_F(KeyCommands, RefuseUnknownWords) {
     init();
     for (const std::vector<std::string>& arguments :
          {std::vector<std::string>{"rotate"},
@@ -70,7 +70,7 @@ TEST_F(KeyCommands, FindTheServiceInTheEnvironment) {
     }
 }
 
-TEST_F(KeyCommands, SayWhatTheyFound) {
+TEST_F(KeyCommands, PrintTheirFindings) {
     init();
     const Outcome good = runProgram({"check", service_});
     EXPECT_EQ(good.exitStatus, 0) << good.out;
@@ -106,7 +106,7 @@ TEST_F(KeyCommands, CheckTheAccessListAndTheClientAuthority) {
     EXPECT_THAT(foreign.out, HasSubstr("is not the one of the certificate in"));
 }
 
-TEST_F(KeyCommands, PutTheRootAndTheRequestWhereTheyAreTold) {
+TEST_F(KeyCommands, WriteTheRootAndTheRequestToTheNamedPlaces) {
     init({"--root-out", directory_ / "safe", "--signer-csr", directory_ / "signer.csr"});
     EXPECT_TRUE(std::filesystem::exists(directory_ / "safe/root.key"));
     EXPECT_TRUE(readFile(directory_ / "signer.csr").starts_with("-----BEGIN CERTIFICATE REQUEST-----"));
@@ -117,7 +117,7 @@ TEST_F(KeyCommands, PutTheRootAndTheRequestWhereTheyAreTold) {
     EXPECT_EQ(runProgram({"rotate", service_, "server", "--root", directory_ / "safe"}).exitStatus, 0);
 }
 
-TEST_F(KeyCommands, AreNotTriedWithSettingsThatHoldAMistake) {
+TEST_F(KeyCommands, RefuseInvalidSettings) {
     init();
     writeFile(service_ + "/service/service.json", R"({"hosts":["localhost"],"pasphraseFile":"x"})");
     for (const char* command : {"check", "list", "serve"}) {

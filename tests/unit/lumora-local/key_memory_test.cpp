@@ -130,7 +130,7 @@ class KeyMemory : public testing::Test {
     const std::string path = directory / "site";
 };
 
-TEST_F(KeyMemory, HoldsNothingOfTheSigningKeyWhenTheSignerIsGone) {
+TEST_F(KeyMemory, IsFreeOfTheSigningKeyAfterTheSigner) {
     const ServiceDirectory service = ServiceDirectory::open(path);
     const KeyTraces traces(service.signerKeyPath());
     {
@@ -143,7 +143,7 @@ TEST_F(KeyMemory, HoldsNothingOfTheSigningKeyWhenTheSignerIsGone) {
     expectNoTraceOf(traces);
 }
 
-TEST_F(KeyMemory, HoldsNothingOfTheServersKeyWhenItIsReplacedOrGone) {
+TEST_F(KeyMemory, IsFreeOfTheServersKeyAfterItsReplacementOrEnd) {
     const ServiceDirectory service = ServiceDirectory::open(path);
     const KeyTraces traces(service.serverKeyPath());
     {
@@ -155,7 +155,7 @@ TEST_F(KeyMemory, HoldsNothingOfTheServersKeyWhenItIsReplacedOrGone) {
     expectNoTraceOf(traces);
 }
 
-TEST_F(KeyMemory, HoldsNoTextOfTheKeysThatInitHasMade) {
+TEST_F(KeyMemory, IsFreeOfTheKeysThatInitMade) {
     const pinwell::test::TemporaryDirectory other;
     static_cast<void>(ServiceDirectory::create(other / "site", {}, kNow));
     for (const char* const name : {"root", "ticket-intermediate", "ticket-signer", "server"})

@@ -99,7 +99,7 @@ TEST_F(Keys, AreOpenedWithACredential) {
     EXPECT_EQ(failureOf([&] { ticketFrom(open()); }), EX_NOINPUT);
 }
 
-TEST_F(Keys, AreNotMadeWithAPassphraseThatIsNone) {
+TEST_F(Keys, AreNotMadeWithAnInvalidPassphrase) {
     NewService service;
     for (const std::string& text : {std::string(), std::string("\nword"), std::string(1025, 'x')}) {
         writeFile(parent_ / "words", text);
@@ -111,7 +111,7 @@ TEST_F(Keys, AreNotMadeWithAPassphraseThatIsNone) {
     EXPECT_FALSE(std::filesystem::exists(path_));
 }
 
-TEST_F(Keys, ThatAreEncryptedAreNotUsedWithoutAPassphrase) {
+TEST_F(Keys, AreNotUsedEncryptedWithoutAPassphrase) {
     writeFile(parent_ / "words", "word");
     NewService service;
     service.passphraseFile = parent_ / "words";
@@ -120,7 +120,7 @@ TEST_F(Keys, ThatAreEncryptedAreNotUsedWithoutAPassphrase) {
     EXPECT_EQ(failureOf([&] { ticketFrom(open()); }), EX_CONFIG);
 }
 
-TEST_F(Keys, OfTheRootLeaveTheService) {
+TEST_F(Keys, OfTheRootCanBeKeptElsewhere) {
     NewService service;
     service.rootDirectory = parent_ / "safe";
     create(service);
@@ -138,7 +138,7 @@ TEST_F(Keys, OfTheRootLeaveTheService) {
     EXPECT_EQ(check(), 0) << last_;
 }
 
-TEST_F(Keys, OfTheRootAreNotLeftBehindWithoutAService) {
+TEST_F(Keys, OfTheRootAreRemovedIfTheServiceCannotBeMade) {
     NewService service;
     service.rootDirectory = parent_ / "safe";
     service.signerRequest = parent_ / "missing/request.pem";
@@ -218,13 +218,13 @@ class CertifiedElsewhere : public Keys {
     const ServiceDirectory authority_ = ServiceDirectory::create(parent_ / "authority", {}, kNow);
 };
 
-TEST_F(CertifiedElsewhere, SignsNothingBeforeTheCertificateIsThere) {
+TEST_F(CertifiedElsewhere, SignsNothingBeforeItsCertificateIsInstalled) {
     EXPECT_EQ(failureOf([&] { ticketFrom(open()); }), EX_CONFIG);
     EXPECT_EQ(check(), EX_CONFIG);
     EXPECT_FALSE(std::filesystem::exists(inService("ticket-intermediate.key")));
 }
 
-TEST_F(CertifiedElsewhere, SignsWithTheCertificateThatWasBroughtIn) {
+TEST_F(CertifiedElsewhere, SignsWithTheInstalledCertificate) {
     certifySignerElsewhere(open(), chainFile(answer(readFile(request_))), "", kNow);
     EXPECT_TRUE(hasCertificateOf(ticketFrom(open()), inAuthority("ticket-intermediate.pem")));
     EXPECT_TRUE(open().settings().signer.requested.empty());

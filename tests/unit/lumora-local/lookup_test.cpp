@@ -92,14 +92,14 @@ TEST_F(LookupTest, DeliversALargeTicketByReference) {
     EXPECT_TRUE(answer["records"][0]["fields"]["signedTicket"].isNil());
 }
 
-TEST_F(LookupTest, SaysWhyARecordHoldsNoTicket) {
+TEST_F(LookupTest, StatesWhyARecordHasNoTicket) {
     const Value answer = lookup(R"({"records":[{"recordName":"unknown"}]})");
     EXPECT_EQ(*answer["records"][0]["reason"].string(), "Record not found");
     EXPECT_EQ(*answer["records"][0]["recordName"].string(), "unknown");
     EXPECT_TRUE(answer["records"][0]["fields"].isNil());
 }
 
-TEST_F(LookupTest, AnswersSeveralRecordsInTheOrderAskedFor) {
+TEST_F(LookupTest, ReturnsRecordsInTheRequestedOrder) {
     const Value answer = lookup(
         R"({"records":[{"recordName":"unknown"},{"recordName":"inline"},{"recordName":"large"},{"recordName":"inline"}]})");
     const Array& records = *answer["records"].array();
@@ -117,19 +117,19 @@ std::string bodyOf(const std::string& name, std::size_t times) {
     return "{\"records\":[" + records + "]}";
 }
 
-TEST_F(LookupTest, LooksUpANameOnceHoweverOftenItComes) {
+TEST_F(LookupTest, LooksUpARepeatedNameOnce) {
     const Value answer = lookup(bodyOf("inline", 200));
     EXPECT_EQ(answer["records"].array()->size(), 200U);
     EXPECT_EQ(records_.lookups, 1);
 }
 
-TEST_F(LookupTest, RefusesAnAnswerOverItsLimit) {
+TEST_F(LookupTest, RefusesAResponseOverItsLimit) {
     EXPECT_EQ(bodyStatus(bodyOf("mebibyte", 5)), 200);
     EXPECT_EQ(bodyStatus(bodyOf("mebibyte", 6)), 413);
     EXPECT_EQ(bodyStatus(bodyOf("mebibyte", 200)), 413);
 }
 
-TEST_F(LookupTest, KeepsItsLimitToTheByteOfWhatIsSent) {
+TEST_F(LookupTest, CountsItsLimitInSentBytes) {
     EXPECT_LE(service_.answerLookup(lookupHead(), bodyOf("mebibyte", 5)).body.size(), kMaximumAnswerSize);
 }
 
@@ -151,12 +151,12 @@ TEST_F(LookupTest, KeepsTheEnvironmentsApart) {
             .isNil());
 }
 
-TEST_F(LookupTest, IgnoresWhatElseARequestSays) {
+TEST_F(LookupTest, IgnoresOtherMembersOfARequest) {
     const Value answer = lookup(R"({"zone":{"a":[]},"records":[{"recordName":"inline","desiredKeys":[1]}]})");
     EXPECT_FALSE(answer["records"][0]["fields"].isNil());
 }
 
-TEST_F(LookupTest, NamesTheHostByWhichTheClientCame) {
+TEST_F(LookupTest, UsesTheHostThatTheClientUsed) {
     const auto urlFor = [&](const std::string& host) {
         RequestHead head = lookupHead();
         head.host = host;
@@ -173,7 +173,7 @@ TEST_F(LookupTest, NamesTheHostByWhichTheClientCame) {
     }
 }
 
-TEST_F(LookupTest, RefusesABodyThatIsNoLookup) {
+TEST_F(LookupTest, RefusesABodyOfAnotherForm) {
     for (const char* body :
          {"", "{", "null", "1", "\"records\"", "[]", "{}", R"({"records":null})", R"({"records":{}})",
           R"({"records":[]})", R"({"records":[null]})", R"({"records":["inline"]})", R"({"records":[{}]})",
@@ -194,7 +194,7 @@ TEST_F(LookupTest, RefusesDeeplyNestedJson) {
     EXPECT_EQ(bodyStatus("{\"records\":" + opening), 400);
 }
 
-TEST_F(LookupTest, HoldsRequestsToTheirLimits) {
+TEST_F(LookupTest, RefusesRequestsOverTheirLimits) {
     const auto bodyOf = [](std::size_t count, std::size_t nameLength) {
         std::string body = "{\"records\":[";
         for (std::size_t i = 0; i < count; ++i) {
@@ -208,7 +208,7 @@ TEST_F(LookupTest, HoldsRequestsToTheirLimits) {
     EXPECT_EQ(bodyStatus(bodyOf(1, kMaximumRecordNameLength + 1)), 400);
 }
 
-TEST_F(LookupTest, HasNothingAtOtherPaths) {
+TEST_F(LookupTest, RefusesOtherPaths) {
     for (const char* target :
          {"/", "", "*", "/database/1/com.ostrel.tm.ticket-delivery/production/public/records/lookup/",
           "/database/2/com.ostrel.tm.ticket-delivery/production/public/records/lookup",
@@ -229,7 +229,7 @@ TEST_F(LookupTest, HasNothingAtOtherPaths) {
     }
 }
 
-TEST_F(LookupTest, TakesAQueryForNoPartOfThePath) {
+TEST_F(LookupTest, IgnoresTheQuery) {
     RequestHead head = lookupHead();
     head.target += "?token=1";
     EXPECT_EQ(service_.answerHead(head), std::nullopt);
@@ -249,7 +249,7 @@ TEST_F(LookupTest, RefusesOtherMethodsAndNamesTheRightOne) {
     EXPECT_EQ(headStatus({"POST", "/assets/" + kAsset + "/a", "", "", ""}), 405);
 }
 
-TEST_F(LookupTest, TakesJsonAlone) {
+TEST_F(LookupTest, AcceptsOnlyJson) {
     const auto statusOf = [&](const std::string& type) {
         RequestHead head = lookupHead();
         head.contentType = type;
@@ -265,7 +265,7 @@ TEST_F(LookupTest, TakesJsonAlone) {
     }
 }
 
-TEST_F(LookupTest, TakesNoEncodedBodies) {
+TEST_F(LookupTest, RefusesEncodedBodies) {
     RequestHead head = lookupHead();
     head.contentEncoding = "gzip";
     EXPECT_EQ(headStatus(head), 415);
@@ -284,7 +284,7 @@ TEST_F(LookupTest, ServesAnAssetUnderAnyPlainName) {
     }
 }
 
-TEST_F(LookupTest, HasNoOtherAssets) {
+TEST_F(LookupTest, RefusesOtherAssets) {
     for (const std::string& target :
          {std::string("/assets/"), std::string("/assets/") + kAsset, "/assets/" + kAsset + "/",
           "/assets/" + std::string(64, 'b') + "/lmasset.ticket",
@@ -303,7 +303,7 @@ TEST_F(LookupTest, ReportsItsHealth) {
     EXPECT_EQ(parse(*answer)["records"].unsignedIntegerValue(), 2U);
 }
 
-TEST_F(LookupTest, LetsAFailureOfTheRecordsThrough) {
+TEST_F(LookupTest, PassesFailuresOfTheStoreOn) {
     records_.failing = true;
     EXPECT_THROW(service_.answerLookup(lookupHead(), R"({"records":[{"recordName":"inline"}]})"),
                  std::runtime_error);

@@ -69,7 +69,7 @@ class ServedMetrics : public ::testing::Test {
     int port_ = 0;
 };
 
-TEST_F(ServedMetrics, CountWhatClientsDid) {
+TEST_F(ServedMetrics, CountRequestsOfClients) {
     const std::string name = service_->put(hashOfSample(1));
     lookUp(name);
     lookUp(name);  // from memory
@@ -97,7 +97,7 @@ TEST_F(ServedMetrics, NameNoRecordAndNoClient) {
     EXPECT_EQ(metrics.find("127.0.0.1"), std::string::npos);
 }
 
-TEST_F(ServedMetrics, SayThatTheRecordsAreLost) {
+TEST_F(ServedMetrics, ReportLostRecords) {
     const std::string name = service_->put(hashOfSample(1));
     std::filesystem::rename(service_->directory().storePath(), service_->path() + "/elsewhere");
     EXPECT_EQ(service_->client()->Post(test::kLookupPath, bodyFor(name), "application/json")->status, 503);
@@ -119,7 +119,7 @@ TEST_F(ServedMetrics, FollowAServerCertificateThatIsReplaced) {
     EXPECT_GT(valueOf(sample), before);
 }
 
-TEST_F(ServedMetrics, AreOnTheirOwnListenerAlone) {
+TEST_F(ServedMetrics, AreOnlyOnTheirOwnListener) {
     EXPECT_EQ(service_->client()->Get("/metrics")->status, 404);
     httplib::Client client("127.0.0.1", port_);
     EXPECT_EQ(client.Get("/healthz")->status, 404);
@@ -134,7 +134,7 @@ TEST_F(ServedMetrics, AreOnTheirOwnListenerAlone) {
     EXPECT_EQ(head->body, "");
 }
 
-TEST_F(ServedMetrics, AreThereWhileOthersSendNothingOrTooMuch) {
+TEST_F(ServedMetrics, AreAvailableDespiteSilentAndHostileClients) {
     httplib::Client large("127.0.0.1", port_);
     EXPECT_FALSE(large.Get("/metrics", {{"X-Large", std::string(100'000, 'x')}}));
     std::vector<std::unique_ptr<httplib::Client>> clients;
@@ -146,7 +146,7 @@ TEST_F(ServedMetrics, AreThereWhileOthersSendNothingOrTooMuch) {
     EXPECT_EQ(valueOf("lumora_store_readable"), 1);
 }
 
-TEST_F(ServedMetrics, AreWhatPrometheusAccepts) {
+TEST_F(ServedMetrics, AreAcceptedByPrometheus) {
     const std::string name = service_->put(hashOfSample(1));
     lookUp(name);
     const pinwell::test::TemporaryDirectory directory;

@@ -98,7 +98,7 @@ TEST(Metrics, CountConnectionsAndRecords) {
     }
 }
 
-TEST(Metrics, AreBoundedInNumberWhateverIsRequested) {
+TEST(Metrics, AreBoundedInNumberForEveryRequest) {
     ServiceCounts counts;
     for (std::size_t kind = 0; kind < kRequestKinds; ++kind)
         for (int status = 0; status < 1000; ++status)

@@ -94,7 +94,7 @@ TEST_F(MigrationTest, CopiesAllAndNamesTheDatabase) {
     EXPECT_EQ(verifyHistory(*store, migration.head).events, 6U);
 }
 
-TEST_F(MigrationTest, LeavesTheOldStoreToNobody) {
+TEST_F(MigrationTest, DisablesTheOldStore) {
     const std::unique_ptr<RecordStore> old = openStore(directory());
     EXPECT_TRUE(old->findTicket(kProduction, "a"));
     migrate(directory(), PostgresCluster::shared().makeDatabase());
@@ -104,7 +104,7 @@ TEST_F(MigrationTest, LeavesTheOldStoreToNobody) {
     EXPECT_FALSE(left.find(kProduction, "d"));
 }
 
-TEST_F(MigrationTest, RefusesADatabaseThatHoldsSomethingElse) {
+TEST_F(MigrationTest, RefusesADatabaseWithOtherContents) {
     const std::string url = PostgresCluster::shared().makeDatabase();
     PostgresCluster& cluster = PostgresCluster::shared();
     migrate(directory(), url);
@@ -115,7 +115,7 @@ TEST_F(MigrationTest, RefusesADatabaseThatHoldsSomethingElse) {
     EXPECT_EQ(directory().storeUrl(), std::nullopt);
 }
 
-TEST_F(MigrationTest, CanBeRepeatedIfOnlyTheDescriptionIsMissing) {
+TEST_F(MigrationTest, CanBeRepeatedIfOnlyTheDescriptionIsUnchanged) {
     const std::string url = PostgresCluster::shared().makeDatabase();
     migrate(directory(), url);
     describe(R"("server":{"key":"server.key","certificate":"server.pem"})");
@@ -137,7 +137,7 @@ TEST_F(MigrationTest, RefusesABrokenLog) {
         "0\n");
 }
 
-TEST_F(MigrationTest, IsEitherDoneOrNotWheneverItIsKilled) {
+TEST_F(MigrationTest, IsWholeOrAbsentAfterAKillAtAnyMoment) {
     if (const auto reason = test::cannotTrace()) GTEST_SKIP() << *reason;
     constexpr int kStep = 23;
     constexpr int kMoreCallsThanItMakes = 100'000;
@@ -167,7 +167,7 @@ TEST_F(MigrationTest, IsEitherDoneOrNotWheneverItIsKilled) {
     EXPECT_GT(done, 0);
 }
 
-TEST_F(MigrationTest, SaysInOneLineWhatDoesNotFit) {
+TEST_F(MigrationTest, ReportsAMismatchInOneLine) {
     const std::string place = "service.json: \"store\"";
     const std::vector<std::vector<std::string>> commands{{"list", service_},
                                                          {"log", service_},
@@ -194,7 +194,7 @@ TEST_F(MigrationTest, SaysInOneLineWhatDoesNotFit) {
     expectRefused({"migrate", service_, "--to", "mysql://db/lumora"}, "--to is not a URL");
 }
 
-TEST_F(MigrationTest, AServiceForLookupsChangesNothing) {
+TEST_F(MigrationTest, RefusesAServiceForLookups) {
     describe("\"role\":\"lookup\"");
     expectRefused({"issue", service_, "--record", kRecord}, "\"role\" is lookup");
     expectRefused({"revoke", service_, "a"}, "\"role\" is lookup");
@@ -205,7 +205,7 @@ TEST_F(MigrationTest, AServiceForLookupsChangesNothing) {
     EXPECT_GT(instance.port(), 0);
 }
 
-TEST_F(MigrationTest, ARunningServiceRefusesLookupsUntilItIsStartedAgain) {
+TEST_F(MigrationTest, StopsLookupsOfARunningServiceUntilItsRestart) {
     const test::ServingInstance instance(service_);
     EXPECT_EQ(test::healthOf(service_, instance.port()), 200);
     migrate(directory(), PostgresCluster::shared().makeDatabase());

@@ -48,7 +48,7 @@ Value parsed(const std::string& text) {
     return *std::move(value);
 }
 
-TEST(Readiness, IsSaidWhileRecordsCanBeRead) {
+TEST(Readiness, IsReportedWhileRecordsCanBeRead) {
     RunningService service;
     const auto ready = service.client()->Get("/readyz");
     ASSERT_TRUE(ready);
@@ -57,7 +57,7 @@ TEST(Readiness, IsSaidWhileRecordsCanBeRead) {
     EXPECT_EQ(service.client()->Post("/readyz")->status, 405);
 }
 
-TEST(Readiness, IsDeniedOnceTheRecordsAreLost) {
+TEST(Readiness, IsDeniedAfterTheRecordsAreLost) {
     RunningService service;
     const std::string name = service.put(sampleHash(1));
     std::filesystem::rename(service.directory().storePath(), service.path() + "/elsewhere");
@@ -121,7 +121,7 @@ class ManagerSocket {
     foundation::FileDescriptor socket_;
 };
 
-TEST(ServiceManagerMessages, TellOfReadinessAndTheEnd) {
+TEST(ServiceManagerMessages, ReportReadinessAndTheEnd) {
     const TemporaryDirectory directory;
     const ManagerSocket manager(directory / "notify");
     const ScopedVariable variable("NOTIFY_SOCKET", directory / "notify");
@@ -132,7 +132,7 @@ TEST(ServiceManagerMessages, TellOfReadinessAndTheEnd) {
     EXPECT_EQ(service.wait(), 0);
 }
 
-TEST(ServiceManagerMessages, AreSignsOfLifeWhereTheyAreWanted) {
+TEST(ServiceManagerMessages, AreSentToAWatchdog) {
     const TemporaryDirectory directory;
     const ManagerSocket manager(directory / "notify");
     const ScopedVariable variable("NOTIFY_SOCKET", directory / "notify");
@@ -143,7 +143,7 @@ TEST(ServiceManagerMessages, AreSignsOfLifeWhereTheyAreWanted) {
     EXPECT_EQ(manager.next(), "WATCHDOG=1");
 }
 
-TEST(ServiceManagerMessages, AreNotNeededToServe) {
+TEST(ServiceManagerMessages, AreOptional) {
     for (const char* address : {"", "relative", "/nowhere/at/all", "@nobody-listens-here"}) {
         const ScopedVariable variable("NOTIFY_SOCKET", address);
         RunningService service;
@@ -192,7 +192,7 @@ TEST_F(Backup, OfARunningServiceBecomesTheSameService) {
     EXPECT_EQ(runProgram({"revoke", restored(), name}).exitStatus, 0);
 }
 
-TEST_F(Backup, HoldsTheFilesThatSettingsName) {
+TEST_F(Backup, ContainsTheFilesThatSettingsName) {
     RunningService service;
     ASSERT_EQ(runProgram({"rotate", service.path(), "signer"}).exitStatus, 0);
     ASSERT_EQ(runProgram({"rotate", service.path(), "server"}).exitStatus, 0);
@@ -201,7 +201,7 @@ TEST_F(Backup, HoldsTheFilesThatSettingsName) {
     EXPECT_EQ(runProgram({"check", restored()}).exitStatus, 0);
 }
 
-TEST_F(Backup, ReplacesNothing) {
+TEST_F(Backup, OverwritesNothing) {
     RunningService service;
     writeFile(file(), "precious");
     expectFailure(runProgram({"backup", service.path(), file()}), 73);
@@ -264,7 +264,7 @@ bool schemaTakes(const std::string& text) {
                .exitStatus == 0;
 }
 
-TEST(SettingsSchema, SaysWhatTheServiceSays) {
+TEST(SettingsSchema, AgreesWithTheService) {
     if (!std::filesystem::exists(JSONSCHEMA_PROGRAM)) GTEST_SKIP() << "jsonschema is not installed";
     for (const char* text : {
              R"({"hosts":["localhost","127.0.0.1","::1"]})",

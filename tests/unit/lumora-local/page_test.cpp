@@ -79,11 +79,11 @@ std::vector<std::string> everyPage(const std::string& text) {
 
 // Rendering.
 
-TEST(Page, ShowsNothingOfARecordAsMarkup) {
+TEST(Page, EscapesMarkupInRecords) {
     for (const std::string& page : everyPage(kMarkup)) EXPECT_THAT(page, HasNoForeignMarkup());
 }
 
-TEST(Page, ShowsNoControlCharactersAndNothingThatTurnsTheDirection) {
+TEST(Page, EscapesControlCharactersAndDirectionMarks) {
     for (const std::string& page : everyPage("a\x1b[2J\xE2\x80\xAE\xFF\x7f")) {
         EXPECT_THAT(page, AllOf(Not(HasSubstr("\x1b")), Not(HasSubstr("\xE2\x80\xAE")),
                                 Not(HasSubstr("\xFF")), Not(HasSubstr("\x7f"))));
@@ -91,7 +91,7 @@ TEST(Page, ShowsNoControlCharactersAndNothingThatTurnsTheDirection) {
     }
 }
 
-TEST(Page, HasItsPlacesAndNoScriptOrStyleOfItsOwn) {
+TEST(Page, HasLandmarksAndNoInlineScriptOrStyle) {
     for (const std::string& page : everyPage("App")) {
         EXPECT_THAT(page, testing::StartsWith("<!DOCTYPE html>\n<html lang=\"en\">"));
         for (const char* const once :
@@ -143,20 +143,20 @@ TEST(Page, NamesARecordWithoutALabelByItsName) {
                 HasSubstr("<bdi>" + recordName(hashOf(1)) + "</bdi></a>"));
 }
 
-TEST(Page, SaysThatThereAreNoRecords) {
+TEST(Page, StatesThatThereAreNoRecords) {
     EXPECT_THAT(resultsPage({{"hash", "ab"}, {}, {}}, kClient),
                 AllOf(HasSubstr("Records whose ticket lists <bdi>ab</bdi>, production: there are none."),
                       Not(HasSubstr("<table"))));
 }
 
-TEST(Page, KeepsWhatWasSearchedForInTheForm) {
+TEST(Page, KeepsTheSearchInTheForm) {
     const std::string page = resultsPage({{"hash", "ab", Environment::development}, {}, {}}, kClient);
     EXPECT_THAT(page, AllOf(HasSubstr("value=\"ab\""), HasSubstr("<option value=\"hash\" selected>"),
                             HasSubstr("<option value=\"development\" selected>")));
     EXPECT_EQ(count(page, " selected"), 2U);
 }
 
-TEST(Page, LinksToTheRecordOfItsEnvironment) {
+TEST(Page, LinksToTheRecordInItsEnvironment) {
     EXPECT_EQ(recordTarget("2/2/ab", Environment::production), "/records/2/2/ab");
     EXPECT_EQ(recordTarget("2/2/ab", Environment::development), "/records/2/2/ab?environment=development");
     EXPECT_EQ(recordTarget("a b/<\"", Environment::production), "/records/a%20b/%3C%22");
@@ -263,7 +263,7 @@ class PageRoutes : public testing::Test {
     std::optional<SqliteStore> store_;
 };
 
-TEST_F(PageRoutes, AnswerWithAStrictPolicy) {
+TEST_F(PageRoutes, SendAStrictPolicy) {
     put(1, "App");
     for (const std::string& target :
          {std::string("/"), std::string("/records"), "/records/" + recordName(hashOf(1)),
@@ -359,7 +359,7 @@ TEST_F(PageRoutes, ShowTheRecordOfTheEnvironment) {
     EXPECT_THAT(body("/records?environment=development"), HasSubstr("href=\"" + target + "\""));
 }
 
-TEST_F(PageRoutes, ShowNoRecordWhoseNameOnlyBeginsSo) {
+TEST_F(PageRoutes, ShowNoRecordWithALongerName) {
     put(1, "App");
     const std::string name = recordName(hashOf(1));
     for (const std::string& wrong :
@@ -369,7 +369,7 @@ TEST_F(PageRoutes, ShowNoRecordWhoseNameOnlyBeginsSo) {
     EXPECT_THAT(body("/records/2%2F2" + name.substr(3)), HasSubstr("App"));
 }
 
-TEST_F(PageRoutes, SayWhatCannotBeSearchedFor) {
+TEST_F(PageRoutes, ReportInvalidSearches) {
     for (const std::string& query :
          {std::string("by=hash&text=zz"), "by=label&text=" + std::string(65, 'a'),
           "by=name&text=" + std::string(300, 'a'), std::string("by=name&text=%C3%A4"), std::string("after=x"),

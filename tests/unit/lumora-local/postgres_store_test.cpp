@@ -55,12 +55,12 @@ class PostgresStoreTest : public testing::Test {
     }
 };
 
-TEST_F(PostgresStoreTest, NamesTheServerThatCannotBeReached) {
+TEST_F(PostgresStoreTest, NamesAnUnreachableServer) {
     expectRefused(placeOf("postgresql:///lumora?host=/nowhere/at/all&user=x"), "/nowhere/at/all");
     expectRefused(placeOf("postgresql://127.0.0.1:1/lumora?user=x"), "127.0.0.1");
 }
 
-TEST_F(PostgresStoreTest, RefusesADatabaseThatIsNotThere) {
+TEST_F(PostgresStoreTest, RefusesAMissingDatabase) {
     expectRefused(placeOf(PostgresCluster::shared().url("nosuch")), "\"nosuch\" does not exist");
 }
 
@@ -74,7 +74,7 @@ TEST_F(PostgresStoreTest, RefusesAnotherEncoding) {
     EXPECT_EQ(failureOf([&] { PostgresStore::create(placeOf(url)); }).exitStatus(), EX_CONFIG);
 }
 
-TEST_F(PostgresStoreTest, RefusesAVersionThatItDoesNotKnow) {
+TEST_F(PostgresStoreTest, RefusesAnUnknownVersion) {
     PostgresCluster& cluster = PostgresCluster::shared();
     const std::string url = cluster.makeDatabase();
     PostgresStore::create(placeOf(url));
@@ -83,7 +83,7 @@ TEST_F(PostgresStoreTest, RefusesAVersionThatItDoesNotKnow) {
     EXPECT_EQ(cluster.sql(url, "SELECT version FROM lumora.store"), "999\n");
 }
 
-TEST_F(PostgresStoreTest, BringsAnEarlierVersionForward) {
+TEST_F(PostgresStoreTest, UpgradesAnEarlierVersion) {
     PostgresCluster& cluster = PostgresCluster::shared();
     const std::string url = cluster.makeDatabase();
     cluster.sql(url,
@@ -97,7 +97,7 @@ TEST_F(PostgresStoreTest, BringsAnEarlierVersionForward) {
     EXPECT_EQ(PostgresStore(place).countRecords(), 1U);
 }
 
-TEST_F(PostgresStoreTest, BringsRecordsAndEventsForward) {
+TEST_F(PostgresStoreTest, UpgradesRecordsAndEvents) {
     PostgresCluster& cluster = PostgresCluster::shared();
     const std::string url = cluster.makeDatabase();
     PostgresStore::create(placeOf(url));
@@ -114,7 +114,7 @@ TEST_F(PostgresStoreTest, BringsRecordsAndEventsForward) {
     EXPECT_EQ(cluster.sql(url, "SELECT version FROM lumora.store"), "2\n");
 }
 
-TEST_F(PostgresStoreTest, StopsWhenAnotherProgramHasBroughtItForward) {
+TEST_F(PostgresStoreTest, StopsAfterAnotherProgramHasUpgradedIt) {
     PostgresCluster& cluster = PostgresCluster::shared();
     const std::string url = cluster.makeDatabase();
     PostgresStore::create(placeOf(url));
@@ -134,7 +134,7 @@ TEST_F(PostgresStoreTest, IsNotMadeOverAnotherStore) {
     EXPECT_EQ(PostgresStore(placeOf(url)).countRecords(), 1U);
 }
 
-TEST_F(PostgresStoreTest, LeavesNothingIfItCannotBeFilled) {
+TEST_F(PostgresStoreTest, LeavesNothingIfFillingFails) {
     PostgresCluster& cluster = PostgresCluster::shared();
     const std::string url = cluster.makeDatabase();
     EXPECT_THROW(PostgresStore::create(placeOf(url),
@@ -157,7 +157,7 @@ TEST_F(PostgresStoreTest, NeverChangesOrRemovesEvents) {
     }
 }
 
-TEST_F(PostgresStoreTest, CommitsToTheDiskWhateverTheServerDoesOtherwise) {
+TEST_F(PostgresStoreTest, CommitsToTheDiskDespiteTheServersDefaults) {
     PostgresCluster& cluster = PostgresCluster::shared();
     const std::string url = cluster.makeDatabase();
     PostgresStore::create(placeOf(url));
@@ -168,7 +168,7 @@ TEST_F(PostgresStoreTest, CommitsToTheDiskWhateverTheServerDoesOtherwise) {
     EXPECT_EQ(rows.text(0, 0), "on");
 }
 
-TEST_F(PostgresStoreTest, KnowsWhatItsUrlNeeds) {
+TEST_F(PostgresStoreTest, DerivesItsNeedsFromTheUrl) {
     EXPECT_FALSE(postgresNeeds("postgresql:///lumora?host=/run/postgresql", "url").tcp);
     EXPECT_TRUE(postgresNeeds("postgresql://db.example/lumora", "url").tcp);
     EXPECT_TRUE(postgresNeeds("postgresql:///lumora?host=/run,db.example", "url").tcp);
@@ -194,7 +194,7 @@ class LostDatabase : public PostgresStoreTest {
     PostgresPlace place_;
 };
 
-TEST_F(LostDatabase, CostsTheCallsThatNeedItAndNoMore) {
+TEST_F(LostDatabase, FailsOnlyTheCallsThatNeedIt) {
     PostgresStore store(place_);
     store.put(kProduction, {makeRecord("a")}, kOccasion);
     cluster_->stopImmediately();
@@ -206,7 +206,7 @@ TEST_F(LostDatabase, CostsTheCallsThatNeedItAndNoMore) {
     EXPECT_FALSE(store.findTicket(kProduction, "b"));
 }
 
-TEST_F(LostDatabase, ThatCameBackIsNotNoticed) {
+TEST_F(LostDatabase, IsUnnoticedAfterItsReturn) {
     PostgresStore store(place_);
     store.put(kProduction, {makeRecord("a")}, kOccasion);
     cluster_->stopImmediately();
@@ -221,7 +221,7 @@ TEST_F(LostDatabase, ThatCameBackIsNotNoticed) {
     EXPECT_EQ(verifyHistory(store, std::nullopt).events, 2U);
 }
 
-TEST_F(LostDatabase, ThatHangsIsWaitedForABoundedTime) {
+TEST_F(LostDatabase, IsWaitedForABoundedTimeIfItHangs) {
     PostgresStore store(place_);
     store.put(kProduction, {makeRecord("a")}, kOccasion);
     cluster_->sql(place_.url, "SELECT 1");
@@ -239,7 +239,7 @@ TEST_F(LostDatabase, ThatHangsIsWaitedForABoundedTime) {
     EXPECT_TRUE(store.findTicket(kProduction, "a"));
 }
 
-TEST_F(LostDatabase, AReplicaServesLookupsAndTakesNoChanges) {
+TEST_F(LostDatabase, LeavesLookupsToAReplica) {
     PostgresStore primary(place_);
     primary.put(kProduction, {makeRecord("a")}, kOccasion);
     PostgresCluster replica(PostgresCluster::ReplicaOf{*cluster_});
@@ -278,7 +278,7 @@ class DoubtfulCommit : public PostgresStoreTest {
     PostgresPlace place_;
 };
 
-TEST_F(DoubtfulCommit, IsRepeatedIfTheServerNeverHeardOfIt) {
+TEST_F(DoubtfulCommit, IsRepeatedIfTheServerDidNotReceiveIt) {
     PostgresStore store(place_);
     cutter_->cut(CommitCutter::Cut::commit);
     EXPECT_NO_THROW(store.put(kProduction, {makeRecord("a")}, kOccasion));
@@ -292,7 +292,7 @@ TEST_F(DoubtfulCommit, IsNotRepeatedIfTheServerHasIt) {
     expectOneEvent(store);
 }
 
-TEST_F(DoubtfulCommit, OfAServerThatFallsSilentIsWaitedForABoundedTime) {
+TEST_F(DoubtfulCommit, IsWaitedForABoundedTimeIfTheServerFallsSilent) {
     PostgresStore store(place_);
     EXPECT_FALSE(store.findTicket(kProduction, "a"));
     cutter_->cut(CommitCutter::Cut::all);

@@ -10,7 +10,7 @@ using foundation::Data;
 const Data kTwentyBytes(20, std::byte{0xAB});
 const Data kFortyEightBytes(48, std::byte{0x01});
 
-TEST(RecordName, HoldsTheDigestTypeAndTheHash) {
+TEST(RecordName, ContainsTheDigestTypeAndTheHash) {
     const std::string name = recordName({2, kTwentyBytes});
     EXPECT_EQ(name, "2/2/abababababababababababababababababababab");
     EXPECT_EQ(name.size(), 4U + 40U);
@@ -20,14 +20,14 @@ TEST(RecordName, IsOfTheFirstFormatForAnUnknownDigestType) {
     EXPECT_EQ(recordName({0, kTwentyBytes}), "1/abababababababababababababababababababab");
 }
 
-TEST(RecordName, CanBeReadBack) {
+TEST(RecordName, CanBeParsed) {
     for (const CodeHash& hash : {CodeHash{0, kTwentyBytes}, CodeHash{1, kTwentyBytes},
                                  CodeHash{3, kTwentyBytes}, CodeHash{4, kFortyEightBytes}}) {
         EXPECT_EQ(parseRecordName(recordName(hash)), hash) << recordName(hash);
     }
 }
 
-TEST(RecordName, IsNotMadeOfAnythingElse) {
+TEST(RecordName, IsNotParsedFromOtherTexts) {
     const std::string hex = recordName({0, kTwentyBytes}).substr(2);
     for (const std::string& text :
          {std::string(), std::string("1/"), hex, "3/" + hex, "2/" + hex, "2/0/" + hex, "2/5/" + hex,

@@ -83,7 +83,7 @@ TEST_P(RecordStoreTest, WithdrawsTheAssetOfAReplacedRecord) {
     EXPECT_EQ(store.findTicket(kProduction, "a")->inlineTicket, foundation::toData("another"));
 }
 
-TEST_P(RecordStoreTest, KnowsNothingOfOtherNames) {
+TEST_P(RecordStoreTest, FindsNothingUnderOtherNames) {
     RecordStore& store = openAndKeep();
     store.put(kProduction, {makeRecord("a", "ticket")}, kOccasion);
     EXPECT_FALSE(store.findTicket(kProduction, "A"));
@@ -99,7 +99,7 @@ TEST_P(RecordStoreTest, KeepsTheEnvironmentsApart) {
     EXPECT_TRUE(store.list(Environment::development).empty());
 }
 
-TEST_P(RecordStoreTest, RemembersAllOfARecord) {
+TEST_P(RecordStoreTest, StoresAllMembersOfARecord) {
     RecordStore& store = openAndKeep();
     SignedRecord entry = makeRecord("a", "ticket");
     entry.record.revoked = true;
@@ -150,7 +150,7 @@ TEST_P(RecordStoreTest, FindsManyTicketsInTheOrderOfTheirNames) {
     EXPECT_TRUE(store.findTickets(kProduction, std::vector<std::string>{"a"}).front());
 }
 
-TEST_P(RecordStoreTest, TellsHowManyRecordsAndEventsItHas) {
+TEST_P(RecordStoreTest, CountsItsRecordsAndEvents) {
     RecordStore& store = openAndKeep();
     EXPECT_EQ(store.facts().records, 0U);
     EXPECT_EQ(store.facts().events, 0U);
@@ -182,7 +182,7 @@ std::vector<Event> eventsOf(RecordStore& store, const EventQuery& query = {}) {
     return events;
 }
 
-TEST_P(RecordStoreTest, LogsWhatHappensToARecord) {
+TEST_P(RecordStoreTest, LogsEachChangeOfARecord) {
     RecordStore& store = openAndKeep();
     store.put(kProduction, {makeRecord("a", "ticket")}, kOccasion);
     store.put(kProduction, {makeRecord("a", "ticket 2")}, kOccasion);
@@ -258,7 +258,7 @@ TEST_P(RecordStoreTest, RefusesATicketForARevokedHashUnderAnotherName) {
     EXPECT_EQ(eventsOf(store).size(), 1U);
 }
 
-TEST_P(RecordStoreTest, IssuesWhatSharesNestedCodeWithARevokedRecord) {
+TEST_P(RecordStoreTest, IssuesForSoftwareThatSharesNestedCodeWithARevokedRecord) {
     RecordStore& store = openAndKeep();
     SignedRecord revoked = listing("2/2/a", {1, 2});
     revoked.record.revoked = true;
@@ -268,7 +268,7 @@ TEST_P(RecordStoreTest, IssuesWhatSharesNestedCodeWithARevokedRecord) {
 
 const Occasion kReinstating{Date{300}, "boss", std::nullopt, "found", true};
 
-TEST_P(RecordStoreTest, ReinstatesARevokedHashUnderAnotherNameIfTold) {
+TEST_P(RecordStoreTest, ReinstatesARevokedHashUnderAnotherNameOnRequest) {
     RecordStore& store = openAndKeep();
     SignedRecord revoked = listing("2/2/a", {1});
     revoked.record.revoked = true;
@@ -328,7 +328,7 @@ TEST_P(RecordStoreTest, LogsThatATicketReinstatesAHashThatAnotherRecordHasRevoke
     EXPECT_EQ(store.put(kProduction, {listing("2/2/b", {9})}, kReinstating).event.action, Action::issued);
 }
 
-TEST_P(RecordStoreTest, RefusesItAlsoIfTheRevocationComesFromAnotherConnection) {
+TEST_P(RecordStoreTest, RefusesATicketThatAnotherConnectionHasRevoked) {
     RecordStore& store = openAndKeep();
     store.put(kProduction, {makeRecord("a", "ticket")}, kOccasion);
     open()->put(kProduction, {revokedRecord("a")}, kOccasion);
@@ -336,7 +336,7 @@ TEST_P(RecordStoreTest, RefusesItAlsoIfTheRevocationComesFromAnotherConnection) 
 }
 
 /// Clients of both environments accept a ticket of either.
-TEST_P(RecordStoreTest, RefusesATicketOfDevelopmentForWhatIsRevokedInProduction) {
+TEST_P(RecordStoreTest, RefusesATicketOfDevelopmentForSoftwareRevokedInProduction) {
     RecordStore& store = openAndKeep();
     SignedRecord revoked = listing("2/2/a", {1, 2});
     revoked.record.revoked = true;
@@ -354,21 +354,21 @@ TEST_P(RecordStoreTest, RefusesATicketOfDevelopmentForWhatIsRevokedInProduction)
               Action::reinstated);
 }
 
-TEST_P(RecordStoreTest, RevokesInDevelopmentForDevelopmentAlone) {
+TEST_P(RecordStoreTest, RevokesInDevelopmentOnlyForDevelopment) {
     RecordStore& store = openAndKeep();
     store.put(Environment::development, {revokedRecord("a")}, kOccasion);
     EXPECT_NO_THROW(store.put(kProduction, {makeRecord("a", "ticket")}, kOccasion));
     EXPECT_THROW(store.put(Environment::development, {makeRecord("a", "ticket")}, kOccasion), RevokedFailure);
 }
 
-TEST_P(RecordStoreTest, ShowsAnOpenReaderWhatAnotherConnectionWrites) {
+TEST_P(RecordStoreTest, ShowsChangesOfOtherConnectionsToAnOpenReader) {
     RecordStore& reader = openAndKeep();
     EXPECT_FALSE(reader.findTicket(kProduction, "a"));
     open()->put(kProduction, {makeRecord("a", "ticket")}, kOccasion);
     EXPECT_TRUE(reader.findTicket(kProduction, "a"));
 }
 
-TEST_P(RecordStoreTest, LetsWritersTakeTurns) {
+TEST_P(RecordStoreTest, SerialisesWriters) {
     constexpr int kWriters = 4;
     constexpr int kRecordsEach = 10;
     std::vector<std::thread> writers;
@@ -426,7 +426,7 @@ TEST_P(RecordStoreTest, TakesTicketsOfManyHashesAndBytes) {
     EXPECT_EQ(verifyHistory(store, std::nullopt).events, 2U);
 }
 
-TEST_P(RecordStoreTest, HandsOverAllItsContents) {
+TEST_P(RecordStoreTest, WalksAllItsContents) {
     RecordStore& store = openAndKeep();
     SignedRecord asset = makeRecord("b", "second");
     asset.record.asAsset = true;
@@ -448,7 +448,7 @@ TEST_P(RecordStoreTest, HandsOverAllItsContents) {
               (std::vector<std::string>{"development z third", "production a first", "production b second"}));
 }
 
-TEST_P(RecordStoreTest, LetsNobodyChangeItWhileItIsHeldStill) {
+TEST_P(RecordStoreTest, RefusesChangesWhileItIsHeldStill) {
     RecordStore& store = openAndKeep();
     std::thread writer;
     store.holdStill([&](const std::function<void()>& confirm) {
@@ -463,7 +463,7 @@ TEST_P(RecordStoreTest, LetsNobodyChangeItWhileItIsHeldStill) {
     EXPECT_EQ(store.countRecords(), 1U);
 }
 
-TEST_P(RecordStoreTest, AsksItsGuardBeforeItReadsOrChanges) {
+TEST_P(RecordStoreTest, CallsItsGuardBeforeItReadsOrChanges) {
     std::atomic<bool> forbidden{false};
     RecordStore& store = openAndKeep([&](StoreUse use) {
         if (use == StoreUse::changing || forbidden) throw Failure(EX_CONFIG, "forbidden");

@@ -47,7 +47,7 @@ class RequestTest : public testing::TestWithParam<std::string> {
 INSTANTIATE_TEST_SUITE_P(In, RequestTest, testing::Values("Sqlite", "Postgres"),
                          [](const auto& parameter) { return parameter.param; });
 
-TEST_P(RequestTest, ChangesNothingWhenItComesAgain) {
+TEST_P(RequestTest, ChangesNothingWhenRepeated) {
     const PutOutcome first = put("first", occasionOf("k", "d"));
     EXPECT_FALSE(first.earlier);
     const PutOutcome again = put("second", occasionOf("k", "d", 200));
@@ -76,7 +76,7 @@ TEST_P(RequestTest, IsRefusedUnderTheKeyOfAnother) {
     EXPECT_EQ(events().size(), 1U);
 }
 
-TEST_P(RequestTest, HasAKeyOfItsClientAlone) {
+TEST_P(RequestTest, HasAKeyThatIsUniqueOnlyForItsClient) {
     put("first", occasionOf("k", "d"));
     Occasion other = occasionOf("k", "e");
     other.request->client = "someone else";
@@ -101,7 +101,7 @@ TEST_P(RequestTest, LeavesNoTraceIfItIsRefused) {
     EXPECT_EQ(put("valid", reinstating).event.action, Action::reinstated);
 }
 
-TEST_P(RequestTest, IsCarriedOutOnceByTwoInstancesAtATime) {
+TEST_P(RequestTest, IsCarriedOutOnceByTwoConcurrentInstances) {
     const auto other = kind_->open({});
     std::vector<std::thread> threads;
     std::atomic<int> first{0};
@@ -119,7 +119,7 @@ TEST_P(RequestTest, IsCarriedOutOnceByTwoInstancesAtATime) {
     EXPECT_EQ(events().size(), 5U);
 }
 
-TEST_P(RequestTest, NotesARefusedAttemptInTheChain) {
+TEST_P(RequestTest, LogsARefusedAttemptInTheChain) {
     put("first", occasionOf("k", "d"));
     store_->noteRefusal({kProduction, "a"}, {Date{300}, "intruder", std::nullopt, "403: no role", false});
     store_->noteRefusal({kProduction, ""}, {Date{301}, "intruder", std::nullopt, "400: no JSON", false});
@@ -134,7 +134,7 @@ TEST_P(RequestTest, NotesARefusedAttemptInTheChain) {
     EXPECT_EQ(all[2].previous, all[1].hash);
 }
 
-TEST_P(RequestTest, LetsTheLogFitTheRecordAfterARefusedAttempt) {
+TEST_P(RequestTest, KeepsTheLogConsistentAfterARefusedAttempt) {
     put("first", occasionOf("k", "d"));
     store_->noteRefusal({kProduction, "a"}, {Date{300}, "intruder", std::nullopt, "", false});
     EXPECT_EQ(verifyHistory(*store_, std::nullopt).events, 2U);

@@ -87,7 +87,7 @@ TEST_P(SignedImage, HoldsACodeDirectoryRequirementsAndAnEmptySignature) {
     EXPECT_EQ(foundation::toHex(blobs_[0x10000]), "fade0b0100000008");
 }
 
-TEST_P(SignedImage, DescribesItselfInTheCodeDirectory) {
+TEST_P(SignedImage, MatchesItsCodeDirectory) {
     ByteReader reader(blobs_[0]);
     EXPECT_EQ(reader.be32("magic"), 0xFADE0C02U);
     EXPECT_EQ(reader.be32("length"), blobs_[0].size());
@@ -184,7 +184,7 @@ TEST(SampleApplication, OverwritesNothing) {
     EXPECT_FALSE(std::filesystem::exists(directory / "Sample.app/Contents/Info.plist"));
 }
 
-TEST(SampleApplication, IsTheSameEveryTime) {
+TEST(SampleApplication, IsReproducible) {
     EXPECT_EQ(makeSignedImage(kCpuTypeArm64, "a", kComponents),
               makeSignedImage(kCpuTypeArm64, "a", kComponents));
 }

@@ -39,14 +39,14 @@ TEST(Samples, AreNotWrittenWhenAnyOfThemExists) {
     }
 }
 
-TEST(Samples, AreNotWrittenInPlaceOfALinkThatLeadsNowhere) {
+TEST(Samples, AreNotWrittenOverADanglingLink) {
     const TemporaryDirectory directory;
     std::filesystem::create_symlink(directory / "elsewhere", directory / "Sample.dmg");
     EXPECT_THROW(writeSamples(directory.path(), kNow), Failure);
     EXPECT_FALSE(std::filesystem::exists(directory / "elsewhere"));
 }
 
-TEST(SampleVolume, IsTheSizeItsBootSectorSays) {
+TEST(SampleVolume, HasTheSizeInItsBootSector) {
     const Data volume = makeSampleVolume("text");
     EXPECT_EQ(volume.size(), kVolumeSectors * kSectorSize);
     ByteReader reader(volume);
@@ -56,7 +56,7 @@ TEST(SampleVolume, IsTheSizeItsBootSectorSays) {
     EXPECT_EQ(reader.be16("mark"), 0x55AA);
 }
 
-TEST(SampleVolume, HoldsNoMoreTextThanItsOneCluster) {
+TEST(SampleVolume, CutsTextAfterItsOneCluster) {
     EXPECT_EQ(makeSampleVolume(std::string(600, 'x')), makeSampleVolume(std::string(512, 'x')));
 }
 
@@ -98,7 +98,7 @@ TEST(SampleDiskImage, IsSignedOverItsTrailerAndEveryPageOfItsData) {
     EXPECT_EQ(digestAt(hashes - 6U * 32U), sha256(foundation::ByteView(plain).subspan(end)));
 }
 
-TEST(SamplePackage, OpensWithAnArchivesHeader) {
+TEST(SamplePackage, BeginsWithAnArchivesHeader) {
     const Data package = makePackage(kNow);
     ByteReader reader(package);
     EXPECT_EQ(foundation::toString(foundation::toData(reader.bytes(4, "magic"))), "xar!");
@@ -107,7 +107,7 @@ TEST(SamplePackage, OpensWithAnArchivesHeader) {
     EXPECT_LT(reader.be64("compressed length"), package.size());
 }
 
-TEST(SamplePackage, IsSignedByAKeyOfItsOwn) {
+TEST(SamplePackage, IsSignedByAFreshKey) {
     EXPECT_NE(makePackage(kNow), makePackage(kNow));
 }
 

@@ -139,7 +139,7 @@ TEST_P(SearchTest, FindsLabelsInAnyEncoding) {
     EXPECT_EQ(pagesOf(labelled("\xFF")), std::vector<Names>{Names{}});
 }
 
-TEST_P(SearchTest, FindsRecordsByAHashWhateverItsDigestType) {
+TEST_P(SearchTest, FindsRecordsByAHashOfAnyDigestType) {
     const Data nested(20, std::byte{7});
     put("a", "L", {{2, Data(20, std::byte{1})}, {2, nested}, {3, nested}});
     put("b", "L", {{1, nested}});
@@ -178,7 +178,7 @@ TEST_P(SearchTest, PagesThroughAllEventsInTheOrderOfTheChain) {
     EXPECT_EQ(pagesOf(search), (std::vector<Names>{{"a", "b"}, {"c"}}));
 }
 
-TEST_P(SearchTest, PagesThroughEventsSinceATimeInItsOrder) {
+TEST_P(SearchTest, PagesThroughEventsSinceATimeInOrderOfTime) {
     for (const auto& [name, time] :
          {std::pair("a", 3), std::pair("b", 1), std::pair("c", 2), std::pair("d", 2), std::pair("e", 4)})
         putAt(name, time);

@@ -70,7 +70,7 @@ TEST(Serve, IsNotTrustedWithoutItsRoot) {
     EXPECT_FALSE(lookup(*client, {"2/2/x"}));
 }
 
-TEST(Serve, DeliversALargeTicketFromTheAddressItGives) {
+TEST(Serve, DeliversALargeTicketFromTheAddressInItsResponse) {
     RunningService service;
     const std::string name = service.put(hashOf(2), true);
     const auto client = service.client();
@@ -95,7 +95,7 @@ TEST(Serve, DeliversALargeTicketFromTheAddressItGives) {
     EXPECT_EQ(part->body, download->body);
 }
 
-TEST(Serve, NamesEveryRequestDifferently) {
+TEST(Serve, GivesEveryRequestItsOwnIdentifier) {
     RunningService service;
     const auto client = service.client();
     client->set_keep_alive(true);
@@ -114,7 +114,7 @@ TEST(Serve, NamesEveryRequestDifferently) {
     EXPECT_FALSE(identifiers.contains(""));
 }
 
-TEST(Serve, SeesWhatAnotherProcessIssuesAndRevokes) {
+TEST(Serve, SeesTicketsAndRevocationsOfAnotherProcess) {
     RunningService service;
     const auto client = service.client();
     const std::string name = recordName(hashOf(3));
@@ -229,7 +229,7 @@ TEST(Serve, ReadsItsCertificateAgainOnHangUp) {
     EXPECT_EQ(certificateOf(service), certificateOf(other));
 }
 
-TEST(Serve, KeepsItsCertificateWhenTheNewOneCannotBeUsed) {
+TEST(Serve, KeepsItsCertificateIfTheNewOneIsUnusable) {
     RunningService service;
     const std::string before = certificateOf(service);
     pinwell::test::writeFile(service.path() + "/service/server.pem", "no certificate");
@@ -240,7 +240,7 @@ TEST(Serve, KeepsItsCertificateWhenTheNewOneCannotBeUsed) {
     EXPECT_EQ(service.wait(), 0);
 }
 
-TEST(Serve, KeepsItsCertificateAndHearsSignalsWhenTheKeyIsAPipe) {
+TEST(Serve, KeepsItsCertificateAndHandlesSignalsIfTheKeyIsAPipe) {
     RunningService service;
     const std::string before = certificateOf(service);
     for (const char* file : {"/service/server.key", "/service/server.pem"}) {
@@ -255,7 +255,7 @@ TEST(Serve, KeepsItsCertificateAndHearsSignalsWhenTheKeyIsAPipe) {
     EXPECT_EQ(service.wait(), 0);
 }
 
-TEST(Serve, TellsWhereItIsAndLeavesThePlatformAlone) {
+TEST(Serve, PrintsItsAddressAndLeavesThePlatformUnchanged) {
     RunningService service;
     const std::string url = "https://127.0.0.1:" + std::to_string(service.port());
     EXPECT_NE(service.output().find("ready at " + url + "\n"), std::string::npos) << service.output();

@@ -136,7 +136,7 @@ TEST(ServerLimits, LetFurtherConnectionsWaitTheirTurn) {
     EXPECT_EQ(answered, 4);
 }
 
-TEST(ServerLimits, DoNotHoldUpTheStop) {
+TEST(ServerLimits, DoNotDelayTheStop) {
     LimitedServer server({.idleTime = std::chrono::hours(1)});
     RawClient idle(server.port());
     server.finish();
@@ -179,7 +179,7 @@ std::string healthAt(int port) {
     return client.readUntil("}").substr(0, 12);
 }
 
-TEST(SilentConnections, HoldBackNoOtherOne) {
+TEST(SilentConnections, DelayNoOtherConnection) {
     LimitedServer server({.handshakeTime = std::chrono::hours(1)});
     SilentPeers silent;
     for (int i = 0; i < 150; ++i) silent.connect(server.port());
@@ -211,7 +211,7 @@ TEST(SilentConnections, EndWhenTheHandshakeTakesTooLong) {
     EXPECT_TRUE(silent.isClosed(0));
 }
 
-TEST(SilentConnections, DoNotHoldUpTheStop) {
+TEST(SilentConnections, DoNotDelayTheStop) {
     LimitedServer server({.handshakeTime = std::chrono::hours(1)});
     SilentPeers silent;
     silent.connect(server.port());
@@ -246,7 +246,7 @@ TEST(HalfSentRequests, MakeRoomTheOldestFirst) {
     EXPECT_THAT(halves.back().client().readUntil("}"), testing::StartsWith("HTTP/1.1 "));
 }
 
-TEST(HalfSentRequests, FinishWhenTheServiceIsToEnd) {
+TEST(HalfSentRequests, FinishBeforeTheServiceEnds) {
     LimitedServer server({.requestTime = std::chrono::hours(1)});
     HalfSentRequest half(server.port());
     std::thread ending([&] { server.finish(); });
@@ -255,7 +255,7 @@ TEST(HalfSentRequests, FinishWhenTheServiceIsToEnd) {
     ending.join();
 }
 
-TEST(Server, SaysThatItsRecordsCannotBeReadAndStaysUp) {
+TEST(Server, ReportsUnreadableRecordsAndContinues) {
     BrokenRecords records;
     LimitedServer server({}, &records);
     for (int i = 0; i < 2; ++i) {

@@ -52,7 +52,7 @@ class ServiceDirectoryTest : public testing::Test {
     const std::string path_ = parent_ / "service-under-test";
 };
 
-TEST_F(ServiceDirectoryTest, TellsClientsWhereToGo) {
+TEST_F(ServiceDirectoryTest, NamesItsHostForClients) {
     create();
     EXPECT_EQ(readFile(path_ + "/platform/platform.json"), "{\"lumora\":{\"host\":\"localhost:8443\"}}\n");
 }
@@ -62,14 +62,14 @@ TEST_F(ServiceDirectoryTest, SendsClientsToTheFirstHostAndTheGivenPort) {
     EXPECT_EQ(directory.advertisedEndpoint(), (Endpoint{"tickets.example", 9000}));
 }
 
-TEST_F(ServiceDirectoryTest, GivesClientsTheRootAlone) {
+TEST_F(ServiceDirectoryTest, GivesClientsOnlyTheRoot) {
     create();
     EXPECT_EQ(entriesIn(path_ + "/platform/roots"), 1U);
     EXPECT_EQ(readFile(path_ + "/platform/roots/lumora-local.pem"), readFile(path_ + "/service/root.pem"));
     EXPECT_EQ(readFile(path_ + "/platform/roots/lumora-local.pem").find("PRIVATE"), std::string::npos);
 }
 
-TEST_F(ServiceDirectoryTest, SpeaksForTheLoopbackNamesByDefault) {
+TEST_F(ServiceDirectoryTest, NamesTheLoopbackHostsByDefault) {
     create();
     const auto server = lumora::test::certificateFromPem(readFile(path_ + "/service/server.pem"));
     ASSERT_NE(server, nullptr);
@@ -78,7 +78,7 @@ TEST_F(ServiceDirectoryTest, SpeaksForTheLoopbackNamesByDefault) {
     EXPECT_EQ(X509_check_ip_asc(server.get(), "::1", 0), 1);
 }
 
-TEST_F(ServiceDirectoryTest, KeepsItsSecretsToItsOwner) {
+TEST_F(ServiceDirectoryTest, IsReadableOnlyByItsOwner) {
     create();
     EXPECT_EQ(modeOf(path_ + "/service"), 0700U);
     for (const char* name :
@@ -92,7 +92,7 @@ TEST_F(ServiceDirectoryTest, KeepsItsSecretsToItsOwner) {
     }
 }
 
-TEST_F(ServiceDirectoryTest, LeavesAnExistingServiceAlone) {
+TEST_F(ServiceDirectoryTest, LeavesAnExistingServiceUnchanged) {
     create();
     const std::string key = readFile(path_ + "/service/root.key");
     EXPECT_EQ(exitStatusOf([&] { create(); }), EX_CANTCREAT);
@@ -100,7 +100,7 @@ TEST_F(ServiceDirectoryTest, LeavesAnExistingServiceAlone) {
     EXPECT_EQ(entriesIn(parent_.path()), 1U);
 }
 
-TEST_F(ServiceDirectoryTest, LeavesAnythingElseInItsPlaceAlone) {
+TEST_F(ServiceDirectoryTest, LeavesOtherFilesInItsPlaceUnchanged) {
     writeFile(path_, "a file");
     EXPECT_EQ(exitStatusOf([&] { create(); }), EX_CANTCREAT);
     EXPECT_EQ(readFile(path_), "a file");
@@ -115,19 +115,19 @@ TEST_F(ServiceDirectoryTest, DoesNotFollowALinkInItsPlace) {
     EXPECT_EQ(entriesIn(parent_.path()), 2U);
 }
 
-TEST_F(ServiceDirectoryTest, MayTakeThePlaceOfAnEmptyDirectory) {
+TEST_F(ServiceDirectoryTest, MayReplaceAnEmptyDirectory) {
     std::filesystem::create_directory(path_);
     create();
     EXPECT_EQ(entriesIn(path_), 2U);
     EXPECT_EQ(entriesIn(parent_.path()), 1U);
 }
 
-TEST_F(ServiceDirectoryTest, TakesATrailingSlash) {
+TEST_F(ServiceDirectoryTest, AcceptsATrailingSlash) {
     ServiceDirectory::create(path_ + "/", {}, Date::now());
     EXPECT_EQ(ServiceDirectory::open(path_ + "/").hosts().size(), 3U);
 }
 
-TEST_F(ServiceDirectoryTest, LeavesNothingBehindWhenItCannotBeMade) {
+TEST_F(ServiceDirectoryTest, LeavesNothingIfItCannotBeMade) {
     const std::string nowhere = parent_ / "missing/service";
     EXPECT_EQ(exitStatusOf([&] { ServiceDirectory::create(nowhere, {}, Date::now()); }), EX_CANTCREAT);
     EXPECT_EQ(entriesIn(parent_.path()), 0U);
@@ -144,7 +144,7 @@ TEST_F(ServiceDirectoryTest, CanBeOpenedAndUsed) {
     EXPECT_FALSE(signer.makeTicket({{{2, foundation::Data(20)}}, false, Date{1}}).empty());
 }
 
-TEST_F(ServiceDirectoryTest, IsNotOpenedWhereThereIsNone) {
+TEST_F(ServiceDirectoryTest, IsNotOpenedIfThereIsNoService) {
     EXPECT_EQ(exitStatusOf([&] { ServiceDirectory::open(path_); }), EX_NOINPUT);
     EXPECT_EQ(exitStatusOf([&] { ServiceDirectory::open(parent_.path()); }), EX_NOINPUT);
 }
@@ -158,7 +158,7 @@ TEST_F(ServiceDirectoryTest, IsNotOpenedWithADamagedDescription) {
     }
 }
 
-TEST_F(ServiceDirectoryTest, CanSendClientsElsewhereAndKeepsWhatElseIsSaid) {
+TEST_F(ServiceDirectoryTest, RewritesTheHostForClientsAndKeepsOtherMembers) {
     const ServiceDirectory directory = create();
     writeFile(path_ + "/platform/platform.json",
               R"({"lumora": {"host": "localhost", "note": 1}, "other": [2]})");
@@ -169,13 +169,13 @@ TEST_F(ServiceDirectoryTest, CanSendClientsElsewhereAndKeepsWhatElseIsSaid) {
     EXPECT_EQ(entriesIn(path_ + "/platform"), 2U);
 }
 
-TEST_F(ServiceDirectoryTest, TakesTheStandardPortWhenNoneIsSaid) {
+TEST_F(ServiceDirectoryTest, UsesTheStandardPortByDefault) {
     const ServiceDirectory directory = create();
     writeFile(path_ + "/platform/platform.json", R"({"lumora": {"host": "localhost"}})");
     EXPECT_EQ(directory.advertisedEndpoint(), (Endpoint{"localhost", 443}));
 }
 
-TEST_F(ServiceDirectoryTest, ReportsAPlatformThatCannotBeUsed) {
+TEST_F(ServiceDirectoryTest, ReportsAnUnusablePlatform) {
     const ServiceDirectory directory = create();
     for (const char* text : {"", "{", "{\"lumora\":{\"host\":\"a b\"}}", "{\"lumora\":{\"host\":1}}"}) {
         writeFile(path_ + "/platform/platform.json", text);

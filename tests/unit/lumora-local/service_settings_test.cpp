@@ -44,7 +44,7 @@ TEST(ServiceSettings, NameFilesBesideThemOrAnywhere) {
     EXPECT_EQ(settings.server.certificate, "/site/service/c.pem");
 }
 
-TEST(ServiceSettings, LeaveTokensAndCredentialsAsTheyAre) {
+TEST(ServiceSettings, KeepTokensAndCredentialsUnchanged) {
     const ServiceSettings settings = parseText(
         R"({"hosts":["a"],"passphraseFile":"credential:keys",
             "signer":{"key":"pkcs11:object=k","chain":["s","i","r"],"requested":"next.key"}})");
@@ -53,14 +53,14 @@ TEST(ServiceSettings, LeaveTokensAndCredentialsAsTheyAre) {
     EXPECT_EQ(settings.signer.requested, "/site/service/next.key");
 }
 
-TEST(ServiceSettings, NameTheFileAndTheKeyThatIsNotKnown) {
+TEST(ServiceSettings, NameTheFileAndTheUnknownKey) {
     EXPECT_EQ(complaintAbout(R"({"hosts":["a"],"hots":["b"]})"),
               "/site/service/service.json: unknown key \"hots\"");
     EXPECT_EQ(complaintAbout(R"({"hosts":["a"],"server":{"key":"k","certificate":"c","chain":"d"}})"),
               "/site/service/service.json: unknown key \"server.chain\"");
 }
 
-TEST(ServiceSettings, AreRefusedUnlessTheyMakeSense) {
+TEST(ServiceSettings, AreRefusedIfInvalid) {
     for (const char* text : {
              R"([])",
              R"({})",

@@ -56,13 +56,13 @@ TEST(SigningProcess, SignsTheDigestOfEachMessage) {
         EXPECT_EQ(key->sign(foundation::asBytes(message)), sha256(foundation::asBytes(message)));
 }
 
-TEST(SigningProcess, PassesOnWhatTheTokenSaysAsItFails) {
+TEST(SigningProcess, PassesOnTheTokensError) {
     const auto key = keyWith([](const Data&) { throw Failure(EX_IOERR, "the token is full"); });
     EXPECT_EQ(failureOf(*key), "the token is full");
     EXPECT_EQ(failureOf(*key), "the token is full");
 }
 
-TEST(SigningProcess, PassesOnWhyTheKeyCannotBeOpened) {
+TEST(SigningProcess, PassesOnTheErrorOfOpeningTheKey) {
     try {
         startSigningProcess(
             []() -> std::unique_ptr<DigestSigner> { throw Failure(EX_CONFIG, "no such token"); });
@@ -73,7 +73,7 @@ TEST(SigningProcess, PassesOnWhyTheKeyCannotBeOpened) {
     }
 }
 
-TEST(SigningProcess, GivesUpATokenThatDoesNotAnswer) {
+TEST(SigningProcess, GivesUpOnATokenThatDoesNotRespond) {
     auto key = keyWith([](const Data&) { ::pause(); }, milliseconds(50));
     EXPECT_EQ(failureOf(*key), kGone);
     // A late response is not taken for the response to another message.
@@ -81,7 +81,7 @@ TEST(SigningProcess, GivesUpATokenThatDoesNotAnswer) {
     key.reset();  // does not wait for the child either
 }
 
-TEST(SigningProcess, SaysThatTheProcessHasEnded) {
+TEST(SigningProcess, ReportsThatTheProcessHasEnded) {
     auto key = keyWith([](const Data&) { ::_exit(1); });
     EXPECT_EQ(failureOf(*key), kGone);
     EXPECT_EQ(failureOf(*key), kGone);

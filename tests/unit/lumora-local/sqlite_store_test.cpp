@@ -37,7 +37,7 @@ TEST_F(SqliteStoreTest, NeverChangesOrRemovesEvents) {
     EXPECT_THROW(database.exec("DELETE FROM event"), SQLite::Exception);
 }
 
-TEST_F(SqliteStoreTest, IsReadableByItsOwnerAlone) {
+TEST_F(SqliteStoreTest, IsReadableOnlyByItsOwner) {
     struct stat status {};
     ASSERT_EQ(::stat(path_.c_str(), &status), 0);
     EXPECT_EQ(status.st_mode & 0777U, 0600U);
@@ -56,7 +56,7 @@ int statusOf(const std::function<void()>& work) {
     }
 }
 
-TEST_F(SqliteStoreTest, AndBackupsGiveOneExitStatusForOneFault) {
+TEST_F(SqliteStoreTest, HasTheExitStatusesOfBackups) {
     const std::string garbage = directory_ / "garbage";
     writeFile(garbage, std::string(4096, 'x'));
     EXPECT_EQ(statusOf([&] { SqliteStore store(garbage); }), EX_DATAERR);
@@ -67,7 +67,7 @@ TEST_F(SqliteStoreTest, AndBackupsGiveOneExitStatusForOneFault) {
     EXPECT_EQ(statusOf([&] { restore(path_, directory_ / "restored"); }), EX_DATAERR);
 }
 
-TEST_F(SqliteStoreTest, RefusesWhatIsNotAStore) {
+TEST_F(SqliteStoreTest, RefusesOtherFiles) {
     writeFile(directory_ / "garbage",
               "this is no database, and long enough that nobody could mistake it for one");
     writeFile(directory_ / "empty", "");

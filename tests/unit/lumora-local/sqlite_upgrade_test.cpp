@@ -52,7 +52,7 @@ TEST_F(SqliteUpgradeTest, KeepsTheRecords) {
     EXPECT_TRUE(store.find(Environment::production, "late")->revoked);
 }
 
-TEST_F(SqliteUpgradeTest, LogsWhatTheRecordsSay) {
+TEST_F(SqliteUpgradeTest, LogsTheStateOfTheRecords) {
     SqliteStore store(path_);
     std::vector<Event> events;
     store.forEachEvent({}, [&](const Event& event) { events.push_back(event); });
@@ -66,7 +66,7 @@ TEST_F(SqliteUpgradeTest, LogsWhatTheRecordsSay) {
     EXPECT_EQ(verifyHistory(store, std::nullopt).events, 2U);
 }
 
-TEST_F(SqliteUpgradeTest, KeepsACopyForTheOwnerAlone) {
+TEST_F(SqliteUpgradeTest, KeepsACopyReadableOnlyByItsOwner) {
     { const SqliteStore store(path_); }
     EXPECT_EQ(versionAt(path_), 3);
     EXPECT_EQ(versionAt(copy_), 1);
@@ -83,7 +83,7 @@ TEST_F(SqliteUpgradeTest, OverwritesNoEarlierCopy) {
     EXPECT_EQ(versionAt(copy_ + ".2"), 1);
 }
 
-TEST_F(SqliteUpgradeTest, HappensOnceWhenManyOpenTheStore) {
+TEST_F(SqliteUpgradeTest, RunsOnceIfManyOpenTheStore) {
     std::vector<std::thread> openers;
     for (int i = 0; i < 4; ++i) openers.emplace_back([&] { const SqliteStore store(path_); });
     for (std::thread& opener : openers) opener.join();
@@ -92,7 +92,7 @@ TEST_F(SqliteUpgradeTest, HappensOnceWhenManyOpenTheStore) {
     EXPECT_FALSE(std::filesystem::exists(copy_ + ".2"));
 }
 
-TEST_F(SqliteUpgradeTest, CountsTheRecordsOfAStoreThatKeptNoCount) {
+TEST_F(SqliteUpgradeTest, CountsTheRecordsOfAStoreWithoutACount) {
     { const SqliteStore store(path_); }
     SQLite::Database(path_, SQLite::OPEN_READWRITE)
         .exec(
@@ -106,7 +106,7 @@ TEST_F(SqliteUpgradeTest, CountsTheRecordsOfAStoreThatKeptNoCount) {
     EXPECT_FALSE(std::filesystem::exists(path_ + ".version-2.2"));
 }
 
-TEST_F(SqliteUpgradeTest, CountsWhatProgramsDoThatKnowOfNoCount) {
+TEST_F(SqliteUpgradeTest, CountsChangesOfEarlierPrograms) {
     SqliteStore store(path_);
     SQLite::Database(path_, SQLite::OPEN_READWRITE)
         .exec(
@@ -116,7 +116,7 @@ TEST_F(SqliteUpgradeTest, CountsWhatProgramsDoThatKnowOfNoCount) {
     EXPECT_EQ(store.countRecords(), 3U);
 }
 
-TEST_F(SqliteUpgradeTest, BringsAStoreThatHasEventsForwardWithoutAnotherEvent) {
+TEST_F(SqliteUpgradeTest, UpgradesAStoreWithEventsWithoutANewEvent) {
     SQLite::Database(path_, SQLite::OPEN_READWRITE).exec(R"(
         CREATE TABLE event (position INTEGER PRIMARY KEY AUTOINCREMENT, time INTEGER NOT NULL,
             actor TEXT NOT NULL, action TEXT NOT NULL, environment TEXT NOT NULL, record TEXT NOT NULL,
@@ -137,7 +137,7 @@ TEST_F(SqliteUpgradeTest, BringsAStoreThatHasEventsForwardWithoutAnotherEvent) {
     EXPECT_TRUE(store.search(search).records.front().record.revoked);
 }
 
-TEST_F(SqliteUpgradeTest, RefusesAVersionOfTheFuture) {
+TEST_F(SqliteUpgradeTest, RefusesALaterVersion) {
     SQLite::Database(path_, SQLite::OPEN_READWRITE).exec("PRAGMA user_version = 4");
     EXPECT_THROW(const SqliteStore store(path_), Failure);
     EXPECT_EQ(versionAt(path_), 4);

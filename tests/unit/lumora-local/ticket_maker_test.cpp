@@ -84,7 +84,7 @@ TEST(TicketPayload, IsOfTheFirstVersionForAHashOfUnknownDigestType) {
     EXPECT_TRUE(reader.atEnd());
 }
 
-TEST(TicketPayload, RefusesWhatNoTicketCanSay) {
+TEST(TicketPayload, RefusesHashesThatNoTicketCanList) {
     EXPECT_EQ(refusalOf({{}, false, Date{1}}), EX_DATAERR);
     EXPECT_EQ(refusalOf({{shortHash(5, 1)}, false, Date{1}}), EX_DATAERR);
     EXPECT_EQ(refusalOf({{{2, Data(32)}}, false, Date{1}}), EX_DATAERR);
@@ -93,7 +93,7 @@ TEST(TicketPayload, RefusesWhatNoTicketCanSay) {
     EXPECT_EQ(refusalOf({{shortHash(0, 1), longHash(1)}, false, Date{1}}), EX_DATAERR);
 }
 
-TEST(TicketPayload, HoldsAsManyHashesAsSixteenMebibytesDo) {
+TEST(TicketPayload, IsBoundedBySixteenMebibytes) {
     constexpr std::size_t kMost = (16 * 1024 * 1024 - 24) / 21;
     std::vector<CodeHash> hashes(kMost, shortHash(2, 7));
     EXPECT_LE(encodeTicketPayload({hashes, false, Date{1}}).size(), kMaximumPayloadSize);
@@ -190,7 +190,7 @@ TEST_F(TicketSignerTest, FillsTheSignatureFieldWithZeroBytes) {
     EXPECT_GT(shortOnes, 0U);
 }
 
-TEST_F(TicketSignerTest, CarriesItsChainLeafFirst) {
+TEST_F(TicketSignerTest, ContainsItsChainLeafFirst) {
     const Container parts = takeApart(signer().makeTicket({{shortHash(2, 1)}, false, Date{1}}));
     ByteReader reader(parts.certificates);
     EXPECT_EQ(reader.u8("tag"), 0x30);

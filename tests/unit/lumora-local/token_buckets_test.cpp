@@ -21,7 +21,7 @@ class TokenBucketsTest : public testing::Test {
     TokenBuckets::Clock::time_point now_{seconds(1000)};
 };
 
-TEST_F(TokenBucketsTest, GiveABurstAndThenOneTokenAnInterval) {
+TEST_F(TokenBucketsTest, AllowABurstAndThenOneTokenAnInterval) {
     TokenBuckets tokens = buckets(3, seconds(2));
     for (int i = 0; i < 3; ++i) EXPECT_EQ(tokens.take("a"), std::nullopt) << i;
     EXPECT_EQ(tokens.take("a"), 2);
@@ -32,7 +32,7 @@ TEST_F(TokenBucketsTest, GiveABurstAndThenOneTokenAnInterval) {
     EXPECT_EQ(tokens.take("a"), 2);
 }
 
-TEST_F(TokenBucketsTest, AreFullAgainAfterAWhileAndNoFuller) {
+TEST_F(TokenBucketsTest, AreRefilledToTheirBurstAtMost) {
     TokenBuckets tokens = buckets(2, seconds(1));
     EXPECT_FALSE(tokens.take("a"));
     EXPECT_FALSE(tokens.take("a"));
@@ -49,13 +49,13 @@ TEST_F(TokenBucketsTest, BelongToOneClientEach) {
     EXPECT_TRUE(tokens.take("a"));
 }
 
-TEST_F(TokenBucketsTest, TellToWaitASecondAtLeast) {
+TEST_F(TokenBucketsTest, ReturnAWaitOfAtLeastASecond) {
     TokenBuckets tokens = buckets(1, milliseconds(50));
     EXPECT_FALSE(tokens.take("a"));
     EXPECT_EQ(tokens.take("a"), 1);
 }
 
-TEST_F(TokenBucketsTest, ForgetTheClientThatWasQuietLongest) {
+TEST_F(TokenBucketsTest, RemoveTheLeastRecentlyUsedClient) {
     TokenBuckets tokens = buckets(1, seconds(1000), 2);
     EXPECT_FALSE(tokens.take("a"));
     EXPECT_FALSE(tokens.take("b"));

@@ -66,7 +66,7 @@ void writeAllSamples(const std::string& directory) {
 }
 const std::set<std::string> kAllSamples{"Sample.app", "Sample.dmg", "Sample.pkg", "Unsigned.dmg"};
 
-TEST(Samples, AreAllThereOrNoneWhicheverCallFails) {
+TEST(Samples, AreAllWrittenOrNoneForEveryFailingCall) {
     const KeptRsaKeys keys;
     EXPECT_THAT(failEachCall([](std::size_t number) { return Trouble::atCall(number, EIO); }, writeAllSamples,
                              kAllSamples),
@@ -82,7 +82,7 @@ TEST(Samples, AreWrittenThroughInterruptions) {
     EXPECT_EQ(namesIn(directory.path()), kAllSamples);
 }
 
-TEST(NewFile, IsNotLeftBehindHalfWritten) {
+TEST(NewFile, IsRemovedIfTheWriteFails) {
     const auto write = [](const std::string& directory) {
         writeNewFile(directory + "/file", foundation::toData("contents"), 0600);
     };
@@ -91,14 +91,14 @@ TEST(NewFile, IsNotLeftBehindHalfWritten) {
         IsSupersetOf({"write", "fsync"}));
 }
 
-TEST(NewFile, ThatWasThereBeforeIsNotRemoved) {
+TEST(NewFile, KeepsAnExistingFile) {
     const TemporaryDirectory directory;
     pinwell::test::writeFile(directory / "file", "mine");
     EXPECT_THROW(writeNewFile(directory / "file", foundation::toData("contents"), 0600), Failure);
     EXPECT_EQ(pinwell::test::readFile(directory / "file"), "mine");
 }
 
-TEST(PendingDirectory, IsGoneWhenItCannotBePublished) {
+TEST(PendingDirectory, IsRemovedIfItCannotBePublished) {
     const auto write = [](const std::string& directory) {
         PendingDirectory pending(directory + "/new", 0700);
         writeNewFile(pending.path() + "/file", foundation::toData("contents"), 0600);
