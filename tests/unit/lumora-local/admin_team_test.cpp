@@ -6,9 +6,7 @@
 #include <thread>
 
 #include "admin_instance.h"
-#include "lumora-local/command_line.h"
 #include "lumora-local/event.h"
-#include "lumora-local/postgres_store.h"
 #include "postgres_cluster.h"
 #include "serving_instance.h"
 
@@ -19,27 +17,20 @@ using test::AdminAnswer;
 using test::AdminClient;
 using test::AdminInstance;
 using test::bodyFor;
-using test::PostgresCluster;
 using test::recordNamed;
 
 constexpr const char* kTicketsPath = "/v1/tickets";
 
-class AdminTeamTest : public testing::Test {
+class AdminTeamTest : public test::OwnClusterTest {
   protected:
     void SetUp() override {
-        if (const auto reason = PostgresCluster::missing()) GTEST_SKIP() << *reason;
-        cluster_ = std::make_unique<PostgresCluster>();
-        std::string url = cluster_->makeDatabase();
-        cluster_->sql(url, "CREATE ROLE \"" + nameOfCaller() + "\" SUPERUSER LOGIN");
-        url.erase(url.find("&user="));
-        place_ = {.url = url, .named = "test"};
-        const auto moved = test::runLumora({"migrate", service_.path(), "--to", url});
+        OwnClusterTest::SetUp();
+        if (IsSkipped()) return;
+        const auto moved = test::runLumora({"migrate", service_.path(), "--to", place_.url});
         ASSERT_EQ(moved.exitStatus, 0) << moved.errors;
     }
 
     const test::ServiceWithClients service_;
-    std::unique_ptr<PostgresCluster> cluster_;
-    PostgresPlace place_;
 };
 
 TEST_F(AdminTeamTest, ReturnsTheOtherInstancesResponseToARepeatedRequest) {

@@ -10,6 +10,7 @@
 #include <thread>
 #include <vector>
 
+#include "lumora-local/command_line.h"
 #include "support/require.h"
 
 namespace pinwell::lumora::test {
@@ -118,6 +119,13 @@ void PostgresCluster::stopImmediately() {
     server_->sendSignal(SIGQUIT);
     server_->wait();
     server_.reset();
+}
+
+PostgresPlace PostgresCluster::makeDatabaseOfCaller() {
+    std::string url = makeDatabase();
+    sql(url, "CREATE ROLE \"" + nameOfCaller() + "\" SUPERUSER LOGIN");
+    url.erase(url.find("&user="));
+    return {.url = std::move(url), .named = "test"};
 }
 
 std::string PostgresCluster::url(const std::string& database) const {

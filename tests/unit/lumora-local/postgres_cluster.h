@@ -1,10 +1,13 @@
 // A PostgreSQL cluster of a test's own: real programs, a socket in the test's folder, no TCP.
 #pragma once
 
+#include <gtest/gtest.h>
+
 #include <memory>
 #include <optional>
 #include <string>
 
+#include "lumora-local/postgres_store.h"
 #include "support/process.h"
 #include "support/temporary_directory.h"
 
@@ -32,8 +35,12 @@ class PostgresCluster {
     PostgresCluster(const PostgresCluster&) = delete;
     PostgresCluster& operator=(const PostgresCluster&) = delete;
 
-    /// Makes an empty database. Returns its URL.
+    /// Makes an empty database. Returns its URL, with a superuser.
     std::string makeDatabase(const std::string& options = "");
+
+    /// Makes an empty database for this program's user. Its URL has no user, so that programs must know
+    /// theirs even after giving up their rights. Once for a cluster.
+    PostgresPlace makeDatabaseOfCaller();
 
     /// The URL of a database by its name.
     std::string url(const std::string& database) const;
@@ -57,6 +64,19 @@ class PostgresCluster {
     pinwell::test::TemporaryDirectory directory_;
     std::unique_ptr<pinwell::test::RunningProcess> server_;
     int databases_ = 0;
+};
+
+/// Tests with a cluster that they may kill, and an empty database of the caller in it.
+class OwnClusterTest : public testing::Test {
+  protected:
+    void SetUp() override {
+        if (const auto reason = PostgresCluster::missing()) GTEST_SKIP() << *reason;
+        cluster_ = std::make_unique<PostgresCluster>();
+        place_ = cluster_->makeDatabaseOfCaller();
+    }
+
+    std::unique_ptr<PostgresCluster> cluster_;
+    PostgresPlace place_;
 };
 
 }  // namespace pinwell::lumora::test

@@ -23,26 +23,9 @@ using test::kOccasion;
 using test::kProduction;
 using test::makeRecord;
 
-class RecordStoreTest : public testing::TestWithParam<std::string> {
-  protected:
-    void SetUp() override {
-        if (const auto reason = test::whyMissing(GetParam())) GTEST_SKIP() << *reason;
-        kind_ = test::makeStoreKind(GetParam());
-    }
+class RecordStoreTest : public test::EveryStoreTest {};
 
-    std::unique_ptr<RecordStore> open(StoreGuard guard = {}) { return kind_->open(std::move(guard)); }
-
-    RecordStore& openAndKeep(StoreGuard guard = {}) {
-        kept_.push_back(open(std::move(guard)));
-        return *kept_.back();
-    }
-
-    std::unique_ptr<test::StoreKind> kind_;
-    std::vector<std::unique_ptr<RecordStore>> kept_;
-};
-
-INSTANTIATE_TEST_SUITE_P(In, RecordStoreTest, testing::Values("Sqlite", "Postgres"),
-                         [](const auto& parameter) { return parameter.param; });
+INSTANTIATE_TEST_SUITE_P(In, RecordStoreTest, test::everyStore(), test::nameOfStore);
 
 TEST_P(RecordStoreTest, DeliversATicketInline) {
     RecordStore& store = openAndKeep();

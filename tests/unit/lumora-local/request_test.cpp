@@ -16,14 +16,8 @@ using foundation::Date;
 using test::kProduction;
 using test::makeRecord;
 
-class RequestTest : public testing::TestWithParam<std::string> {
+class RequestTest : public test::EveryStoreTest {
   protected:
-    void SetUp() override {
-        if (const auto reason = test::whyMissing(GetParam())) GTEST_SKIP() << *reason;
-        kind_ = test::makeStoreKind(GetParam());
-        store_ = kind_->open({});
-    }
-
     static Occasion occasionOf(const std::string& key, const std::string& digest, std::int64_t time = 100) {
         Occasion occasion{Date{time}, "ci", std::nullopt, "", false};
         occasion.request = RequestIdentity{"ci", key, digest};
@@ -31,21 +25,17 @@ class RequestTest : public testing::TestWithParam<std::string> {
     }
 
     PutOutcome put(const std::string& ticket, const Occasion& occasion) {
-        return store_->put(kProduction, {makeRecord("a", ticket)}, occasion);
+        return store().put(kProduction, {makeRecord("a", ticket)}, occasion);
     }
 
     std::vector<Event> events() {
         std::vector<Event> all;
-        store_->forEachEvent({}, [&](const Event& event) { all.push_back(event); });
+        store().forEachEvent({}, [&](const Event& event) { all.push_back(event); });
         return all;
     }
-
-    std::unique_ptr<test::StoreKind> kind_;
-    std::unique_ptr<RecordStore> store_;
 };
 
-INSTANTIATE_TEST_SUITE_P(In, RequestTest, testing::Values("Sqlite", "Postgres"),
-                         [](const auto& parameter) { return parameter.param; });
+INSTANTIATE_TEST_SUITE_P(In, RequestTest, test::everyStore(), test::nameOfStore);
 
 TEST_P(RequestTest, ChangesNothingWhenRepeated) {
     const PutOutcome first = put("first", occasionOf("k", "d"));
@@ -55,19 +45,19 @@ TEST_P(RequestTest, ChangesNothingWhenRepeated) {
     EXPECT_EQ(again.event.action, Action::issued);
     EXPECT_EQ(again.earlier, foundation::toData("first"));
     EXPECT_EQ(events().size(), 1U);
-    EXPECT_EQ(store_->findTicket(kProduction, "a")->inlineTicket, foundation::toData("first"));
+    EXPECT_EQ(store().findTicket(kProduction, "a")->inlineTicket, foundation::toData("first"));
 }
 
 TEST_P(RequestTest, KeepsItsTicketWhenTheRecordGetsAnother) {
     put("first", occasionOf("k", "d"));
     put("second", occasionOf("l", "e"));
     EXPECT_EQ(put("third", occasionOf("k", "d")).earlier, foundation::toData("first"));
-    EXPECT_EQ(store_->findTicket(kProduction, "a")->inlineTicket, foundation::toData("second"));
+    EXPECT_EQ(store().findTicket(kProduction, "a")->inlineTicket, foundation::toData("second"));
 }
 
 TEST_P(RequestTest, IsKnownToOtherInstances) {
     put("first", occasionOf("k", "d"));
-    EXPECT_TRUE(kind_->open({})->put(kProduction, {makeRecord("a", "x")}, occasionOf("k", "d")).earlier);
+    EXPECT_TRUE(open()->put(kProduction, {makeRecord("a", "x")}, occasionOf("k", "d")).earlier);
 }
 
 TEST_P(RequestTest, IsRefusedUnderTheKeyOfAnother) {
@@ -94,7 +84,7 @@ TEST_P(RequestTest, IsForgottenAfterItsLife) {
 TEST_P(RequestTest, LeavesNoTraceIfItIsRefused) {
     SignedRecord revoked = makeRecord("a", "revoked");
     revoked.record.revoked = true;
-    store_->put(kProduction, {revoked}, test::kOccasion);
+    store().put(kProduction, {revoked}, test::kOccasion);
     EXPECT_THROW(put("valid", occasionOf("k", "d")), RevokedFailure);
     Occasion reinstating = occasionOf("k", "e");
     reinstating.reinstates = true;
@@ -102,14 +92,14 @@ TEST_P(RequestTest, LeavesNoTraceIfItIsRefused) {
 }
 
 TEST_P(RequestTest, IsCarriedOutOnceByTwoConcurrentInstances) {
-    const auto other = kind_->open({});
+    const auto other = open();
     std::vector<std::thread> threads;
     std::atomic<int> first{0};
-    for (RecordStore* store : {store_.get(), other.get()}) {
-        threads.emplace_back([&first, store] {
+    for (RecordStore* instance : {&store(), other.get()}) {
+        threads.emplace_back([&first, instance] {
             for (int i = 0; i < 5; ++i) {
-                const PutOutcome outcome =
-                    store->put(kProduction, {makeRecord("a", "x")}, occasionOf("k" + std::to_string(i), "d"));
+                const PutOutcome outcome = instance->put(kProduction, {makeRecord("a", "x")},
+                                                         occasionOf("k" + std::to_string(i), "d"));
                 if (!outcome.earlier) ++first;
             }
         });
@@ -121,8 +111,8 @@ TEST_P(RequestTest, IsCarriedOutOnceByTwoConcurrentInstances) {
 
 TEST_P(RequestTest, LogsARefusedAttemptInTheChain) {
     put("first", occasionOf("k", "d"));
-    store_->noteRefusal({kProduction, "a"}, {Date{300}, "intruder", std::nullopt, "403: no role", false});
-    store_->noteRefusal({kProduction, ""}, {Date{301}, "intruder", std::nullopt, "400: no JSON", false});
+    store().noteRefusal({kProduction, "a"}, {Date{300}, "intruder", std::nullopt, "403: no role", false});
+    store().noteRefusal({kProduction, ""}, {Date{301}, "intruder", std::nullopt, "400: no JSON", false});
     const std::vector<Event> all = events();
     ASSERT_EQ(all.size(), 3U);
     EXPECT_EQ(all[1].action, Action::refused);
@@ -136,10 +126,10 @@ TEST_P(RequestTest, LogsARefusedAttemptInTheChain) {
 
 TEST_P(RequestTest, KeepsTheLogConsistentAfterARefusedAttempt) {
     put("first", occasionOf("k", "d"));
-    store_->noteRefusal({kProduction, "a"}, {Date{300}, "intruder", std::nullopt, "", false});
-    EXPECT_EQ(verifyHistory(*store_, std::nullopt).events, 2U);
+    store().noteRefusal({kProduction, "a"}, {Date{300}, "intruder", std::nullopt, "", false});
+    EXPECT_EQ(verifyHistory(store(), std::nullopt).events, 2U);
     EXPECT_EQ(put("second", occasionOf("l", "d")).event.action, Action::reissued);
-    EXPECT_EQ(verifyHistory(*store_, std::nullopt).events, 3U);
+    EXPECT_EQ(verifyHistory(store(), std::nullopt).events, 3U);
 }
 
 }  // namespace

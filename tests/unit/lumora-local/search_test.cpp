@@ -14,33 +14,27 @@ using test::makeRecord;
 
 using Names = std::vector<std::string>;
 
-class SearchTest : public testing::TestWithParam<std::string> {
+class SearchTest : public test::EveryStoreTest {
   protected:
-    void SetUp() override {
-        if (const auto reason = test::whyMissing(GetParam())) GTEST_SKIP() << *reason;
-        kind_ = test::makeStoreKind(GetParam());
-        store_ = kind_->open({});
-    }
-
     void put(const std::string& name, const std::string& label, const std::vector<CodeHash>& hashes = {},
              Environment environment = kProduction) {
         SignedRecord record = makeRecord(name);
         record.record.label = label;
         if (!hashes.empty()) record.record.hashes = hashes;
-        store_->put(environment, {record}, test::kOccasion);
+        store().put(environment, {record}, test::kOccasion);
     }
 
     void putAt(const std::string& name, std::int64_t time) {
         Occasion occasion = test::kOccasion;
         occasion.time = Date{time};
-        store_->put(kProduction, {makeRecord(name)}, occasion);
+        store().put(kProduction, {makeRecord(name)}, occasion);
     }
 
     /// Page after page.
     std::vector<Names> pagesOf(RecordSearch search) {
         std::vector<Names> pages;
         do {
-            const RecordPage page = store_->search(search);
+            const RecordPage page = store().search(search);
             Names names;
             for (const FoundRecord& found : page.records) names.push_back(found.record.name);
             pages.push_back(names);
@@ -52,7 +46,7 @@ class SearchTest : public testing::TestWithParam<std::string> {
     std::vector<Names> pagesOf(EventSearch search) {
         std::vector<Names> pages;
         do {
-            const EventPage page = store_->search(search);
+            const EventPage page = store().search(search);
             Names names;
             for (const Event& event : page.events) names.push_back(event.record);
             pages.push_back(names);
@@ -81,13 +75,9 @@ class SearchTest : public testing::TestWithParam<std::string> {
         search.hash = hash;
         return search;
     }
-
-    std::unique_ptr<test::StoreKind> kind_;
-    std::unique_ptr<RecordStore> store_;
 };
 
-INSTANTIATE_TEST_SUITE_P(In, SearchTest, testing::Values("Sqlite", "Postgres"),
-                         [](const auto& parameter) { return parameter.param; });
+INSTANTIATE_TEST_SUITE_P(In, SearchTest, test::everyStore(), test::nameOfStore);
 
 TEST_P(SearchTest, FindsNothingInAnEmptyStore) {
     EXPECT_EQ(pagesOf(everything(3)), std::vector<Names>{Names{}});
@@ -159,7 +149,7 @@ TEST_P(SearchTest, ShowsARecordWithItsFirstHashes) {
     put("a", "L", hashes);
     hashes.pop_back();
     put("b", "M", hashes);
-    const RecordPage page = store_->search(everything(2));
+    const RecordPage page = store().search(everything(2));
     ASSERT_EQ(page.records.size(), 2U);
     EXPECT_TRUE(page.records[0].hashesCut);
     EXPECT_EQ(page.records[0].record.hashes, hashes);

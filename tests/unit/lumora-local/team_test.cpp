@@ -7,9 +7,7 @@
 
 #include "foundation/base64.h"
 #include "foundation/format.h"
-#include "lumora-local/command_line.h"
 #include "lumora-local/event.h"
-#include "lumora-local/postgres_store.h"
 #include "postgres_cluster.h"
 #include "running_service.h"
 #include "serving_instance.h"
@@ -24,7 +22,6 @@ using pinwell::test::RunningProcess;
 using pinwell::test::TemporaryDirectory;
 using pinwell::test::writeFile;
 using test::Load;
-using test::PostgresCluster;
 using test::ServingInstance;
 
 void expectNothingLost(const Load& load, RecordStore& store) {
@@ -43,24 +40,17 @@ void expectNothingLost(const Load& load, RecordStore& store) {
 }
 
 /// A service that has moved to a database in a new cluster.
-class Team : public testing::Test {
+class Team : public test::OwnClusterTest {
   protected:
     void SetUp() override {
-        if (const auto reason = PostgresCluster::missing()) GTEST_SKIP() << *reason;
-        cluster_ = std::make_unique<PostgresCluster>();
-        std::string url = cluster_->makeDatabase();
-        // The URL has no user: the service must know the user even after giving up its rights.
-        cluster_->sql(url, "CREATE ROLE \"" + nameOfCaller() + "\" SUPERUSER LOGIN");
-        url.erase(url.find("&user="));
-        place_ = {.url = url, .named = "test"};
+        OwnClusterTest::SetUp();
+        if (IsSkipped()) return;
         service_ = test::makeService(directory_, "service");
         const ProcessResult moved = test::runLumora({"migrate", service_, "--to", place_.url});
         ASSERT_EQ(moved.exitStatus, 0) << moved.errors;
     }
 
     const TemporaryDirectory directory_;
-    std::unique_ptr<PostgresCluster> cluster_;
-    PostgresPlace place_;
     std::string service_;
 };
 
