@@ -7,8 +7,6 @@
 namespace pinwell::lumora {
 namespace {
 
-using MarkerHandle = foundation::Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
-
 constexpr std::size_t kMaximumCertificateFile = std::size_t{64} * 1024;
 
 }  // namespace
@@ -65,7 +63,7 @@ constexpr std::size_t kChainLength = 3;
 }  // namespace
 
 bool carriesMarker(X509* certificate, std::string_view oid) {
-    const MarkerHandle object(OBJ_txt2obj(std::string(oid).c_str(), 1));
+    const ObjectHandle object(OBJ_txt2obj(std::string(oid).c_str(), 1));
     return object != nullptr && X509_get_ext_by_OBJ(certificate, object.get(), -1) >= 0;
 }
 

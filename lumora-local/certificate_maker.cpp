@@ -28,12 +28,10 @@ void releaseExtensions(STACK_OF(X509_EXTENSION) * list) {
 
 using RequestHandle = foundation::Handle<X509_REQ, X509_REQ_free>;
 using ExtensionListHandle = foundation::Handle<STACK_OF(X509_EXTENSION), releaseExtensions>;
-using BigNumberHandle = foundation::Handle<BIGNUM, BN_free>;
-using ObjectHandle = foundation::Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
 using OctetStringHandle = foundation::Handle<ASN1_OCTET_STRING, ASN1_OCTET_STRING_free>;
 
 void setSerialNumber(X509* certificate) {
-    const BigNumberHandle number(BN_new());
+    const NumberHandle number(BN_new());
     require(number != nullptr &&
                 BN_rand(number.get(), kSerialNumberBits, BN_RAND_TOP_ANY, BN_RAND_BOTTOM_ANY) == 1 &&
                 BN_add_word(number.get(), 1) == 1 &&

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <openssl/bio.h>
+#include <openssl/bn.h>
 #include <openssl/err.h>
 #include <openssl/evp.h>
 #include <openssl/pem.h>
@@ -22,6 +23,8 @@ using KeyHandle = foundation::Handle<EVP_PKEY, EVP_PKEY_free>;
 using CertificateHandle = foundation::Handle<X509, X509_free>;
 using ExtensionHandle = foundation::Handle<X509_EXTENSION, X509_EXTENSION_free>;
 using BioHandle = foundation::Handle<BIO, BIO_free_all>;
+using NumberHandle = foundation::Handle<BIGNUM, BN_free>;
+using ObjectHandle = foundation::Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
 using DigestContextHandle = foundation::Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
 
 /// The library uses unsigned characters for bytes.

@@ -22,7 +22,6 @@ using foundation::format;
 
 using UriHandle = foundation::Handle<P11KitUri, p11_kit_uri_free>;
 using SignatureHandle = foundation::Handle<ECDSA_SIG, ECDSA_SIG_free>;
-using NumberHandle = foundation::Handle<BIGNUM, BN_free>;
 using ParameterBuilder = foundation::Handle<OSSL_PARAM_BLD, OSSL_PARAM_BLD_free>;
 using Parameters = foundation::Handle<OSSL_PARAM, OSSL_PARAM_free>;
 using KeyContext = foundation::Handle<EVP_PKEY_CTX, EVP_PKEY_CTX_free>;

@@ -17,6 +17,7 @@
 
 #include "foundation/byte_writer.h"
 #include "foundation/handle.h"
+#include "support/openssl_handles.h"
 #include "support/require.h"
 #include "support/ticket_builder.h"
 #include "trust/der.h"
@@ -30,15 +31,11 @@ using foundation::Data;
 
 using foundation::Handle;
 
-using BioHandle = Handle<BIO, BIO_free_all>;
-using CertificateHandle = Handle<X509, X509_free>;
 using EcdsaHandle = Handle<ECDSA_SIG, ECDSA_SIG_free>;
 using NumberHandle = Handle<BIGNUM, BN_free>;
 using DigestHandle = Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
-using ExtensionHandle = Handle<X509_EXTENSION, X509_EXTENSION_free>;
 using KeyContextHandle = Handle<EVP_PKEY_CTX, EVP_PKEY_CTX_free>;
 using NameHandle = Handle<X509_NAME, X509_NAME_free>;
-using ObjectHandle = Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
 using OctetsHandle = Handle<ASN1_OCTET_STRING, ASN1_OCTET_STRING_free>;
 
 const unsigned char* unsignedBytes(const std::byte* bytes) {

@@ -11,27 +11,23 @@
 #include "foundation/handle.h"
 #include "support/cms_parts.h"
 #include "support/code_directory_builder.h"
+#include "support/openssl_handles.h"
 #include "support/require.h"
 
 namespace pinwell::test {
 
 namespace {
 
-using Key = foundation::Handle<EVP_PKEY, EVP_PKEY_free>;
-using Certificate = foundation::Handle<X509, X509_free>;
 using Message = foundation::Handle<CMS_ContentInfo, CMS_ContentInfo_free>;
-using Extension = foundation::Handle<X509_EXTENSION, X509_EXTENSION_free>;
-using Bio = foundation::Handle<BIO, BIO_free_all>;
 using TstInfo = foundation::Handle<TS_TST_INFO, TS_TST_INFO_free>;
 using Imprint = foundation::Handle<TS_MSG_IMPRINT, TS_MSG_IMPRINT_free>;
 using Algorithm = foundation::Handle<X509_ALGOR, X509_ALGOR_free>;
 using Integer = foundation::Handle<ASN1_INTEGER, ASN1_INTEGER_free>;
 using Time = foundation::Handle<ASN1_GENERALIZEDTIME, ASN1_GENERALIZEDTIME_free>;
-using Object = foundation::Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
 
 struct Identity {
-    Key key;
-    Certificate certificate;
+    KeyHandle key;
+    CertificateHandle certificate;
 };
 
 Identity makeIdentity(TestKey kind) {
@@ -52,7 +48,8 @@ Identity makeIdentity(TestKey kind) {
     X509_set_pubkey(certificate, identity.key.get());
     X509V3_CTX context;
     X509V3_set_ctx(&context, certificate, certificate, nullptr, nullptr, 0);
-    const Extension identifier(X509V3_EXT_conf_nid(nullptr, &context, NID_subject_key_identifier, "hash"));
+    const ExtensionHandle identifier(
+        X509V3_EXT_conf_nid(nullptr, &context, NID_subject_key_identifier, "hash"));
     require(identifier && X509_add_ext(certificate, identifier.get(), -1) == 1, "key identifier");
     require(X509_sign(certificate, identity.key.get(), EVP_sha256()) > 0, "certificate signature");
     return identity;
@@ -64,8 +61,8 @@ const Identity& identityWith(TestKey kind) {
     return kind == TestKey::ecP256 ? ec : rsa;
 }
 
-Bio reader(ByteView bytes) {
-    return Bio(BIO_new_mem_buf(bytes.data(), static_cast<int>(bytes.size())));
+BioHandle reader(ByteView bytes) {
+    return BioHandle(BIO_new_mem_buf(bytes.data(), static_cast<int>(bytes.size())));
 }
 
 ByteView viewOf(const ASN1_STRING* string) {
@@ -94,7 +91,7 @@ Message signMessage(const Identity& identity, int contentType, ByteView content,
     flags |= CMS_BINARY | (pss ? CMS_KEY_PARAM : 0U);
     Message message(CMS_sign(nullptr, nullptr, nullptr, nullptr, flags | CMS_PARTIAL));
     require(message != nullptr, "message");
-    Object type(OBJ_dup(OBJ_nid2obj(contentType)));
+    ObjectHandle type(OBJ_dup(OBJ_nid2obj(contentType)));
     require(CMS_set1_eContentType(message.get(), type.get()) == 1, "content type");
     CMS_SignerInfo* const signer =
         CMS_add1_signer(message.get(), identity.certificate.get(), identity.key.get(), EVP_sha256(), flags);
@@ -161,7 +158,7 @@ Data TimestampBuilder::build(ByteView signatureValue) const {
                            static_cast<int>(octets.size()));
 
     const TstInfo info(TS_TST_INFO_new());
-    const Object policy(OBJ_txt2obj("1.2.3.4", 1));
+    const ObjectHandle policy(OBJ_txt2obj("1.2.3.4", 1));
     const Integer serial(ASN1_INTEGER_new());
     ASN1_INTEGER_set(serial.get(), 7);
     const Time time(ASN1_GENERALIZEDTIME_new());

@@ -25,6 +25,7 @@
 #include "foundation/file_io.h"
 #include "foundation/handle.h"
 #include "support/certificate_builder.h"
+#include "support/openssl_handles.h"
 #include "support/require.h"
 
 namespace pinwell::test {
@@ -40,9 +41,6 @@ constexpr std::chrono::seconds kPatience{60};
 
 using ContextHandle = foundation::Handle<SSL_CTX, SSL_CTX_free>;
 using ConnectionHandle = foundation::Handle<SSL, SSL_free>;
-using CertificateHandle = foundation::Handle<X509, X509_free>;
-using KeyHandle = foundation::Handle<EVP_PKEY, EVP_PKEY_free>;
-using MemoryBio = foundation::Handle<BIO, BIO_free>;
 
 bool equalsWithoutCase(std::string_view a, std::string_view b) {
     return a.size() == b.size() && strncasecmp(a.data(), b.data(), a.size()) == 0;
@@ -54,25 +52,25 @@ std::optional<std::string> findHeader(const HeaderList& headers, std::string_vie
     return std::nullopt;
 }
 
-MemoryBio bioOf(const std::string& text) {
-    return MemoryBio(BIO_new_mem_buf(text.data(), static_cast<int>(text.size())));
+BioHandle bioOf(const std::string& text) {
+    return BioHandle(BIO_new_mem_buf(text.data(), static_cast<int>(text.size())));
 }
 
 void useIdentity(SSL_CTX* context, const ServerIdentity& identity) {
-    const MemoryBio chain = bioOf(identity.certificateChain);
+    const BioHandle chain = bioOf(identity.certificateChain);
     const CertificateHandle leaf(PEM_read_bio_X509(chain.get(), nullptr, nullptr, nullptr));
     require(leaf != nullptr, "no certificate in the chain");
     require(SSL_CTX_use_certificate(context, leaf.get()) == 1, "the leaf certificate cannot be used");
     while (const CertificateHandle next{PEM_read_bio_X509(chain.get(), nullptr, nullptr, nullptr)})
         require(SSL_CTX_add1_chain_cert(context, next.get()) == 1, "a chain certificate cannot be used");
     ERR_clear_error();  // the end of the text is an error there
-    const MemoryBio keyText = bioOf(identity.privateKey);
+    const BioHandle keyText = bioOf(identity.privateKey);
     const KeyHandle key(PEM_read_bio_PrivateKey(keyText.get(), nullptr, nullptr, nullptr));
     require(key && SSL_CTX_use_PrivateKey(context, key.get()) == 1, "the private key cannot be used");
 }
 
 void requireClients(SSL_CTX* context, const std::string& authority) {
-    const MemoryBio text = bioOf(authority);
+    const BioHandle text = bioOf(authority);
     const CertificateHandle root(PEM_read_bio_X509(text.get(), nullptr, nullptr, nullptr));
     require(root && X509_STORE_add_cert(SSL_CTX_get_cert_store(context), root.get()) == 1,
             "the clients' authority cannot be used");

@@ -19,10 +19,11 @@ constexpr std::int64_t kDay = 86'400;
 class AuthorityTest : public testing::Test {
   protected:
     const Authority authority_ = createAuthority({"tickets.example", "127.0.0.1", "::1"}, kNow);
-    const test::Certificate root_ = certificateFromPem(authority_.root.certificate);
-    const test::Certificate intermediate_ = certificateFromPem(authority_.ticketIntermediate.certificate);
-    const test::Certificate signer_ = certificateFromPem(authority_.ticketSigner.certificate);
-    const test::Certificate server_ = certificateFromPem(authority_.server.certificate);
+    const test::CertificateHandle root_ = certificateFromPem(authority_.root.certificate);
+    const test::CertificateHandle intermediate_ =
+        certificateFromPem(authority_.ticketIntermediate.certificate);
+    const test::CertificateHandle signer_ = certificateFromPem(authority_.ticketSigner.certificate);
+    const test::CertificateHandle server_ = certificateFromPem(authority_.server.certificate);
     const std::vector<X509*> all_{root_.get(), intermediate_.get(), signer_.get(), server_.get()};
 };
 
@@ -96,7 +97,7 @@ TEST_F(AuthorityTest, UsesP256KeysAndSha256) {
 TEST_F(AuthorityTest, ReturnsTheKeyOfEachCertificate) {
     for (const Identity* identity :
          {&authority_.root, &authority_.ticketIntermediate, &authority_.ticketSigner, &authority_.server}) {
-        const test::Key key = keyFromPem(identity->privateKey);
+        const test::KeyHandle key = keyFromPem(identity->privateKey);
         EXPECT_EQ(X509_check_private_key(certificateFromPem(identity->certificate).get(), key.get()), 1);
     }
 }
@@ -151,7 +152,7 @@ TEST(Authority, AcceptsTheLongestHostName) {
     for (int i = 0; i < 126; ++i) longest += "a.";
     longest += "a";
     const Authority authority = createAuthority({longest}, kNow);
-    const test::Certificate server = certificateFromPem(authority.server.certificate);
+    const test::CertificateHandle server = certificateFromPem(authority.server.certificate);
     EXPECT_EQ(X509_check_host(server.get(), longest.c_str(), longest.size(), 0, nullptr), 1);
 }
 

@@ -196,7 +196,7 @@ class CertifiedElsewhere : public Keys {
 
     /// The chain that the authority returns for a request.
     std::string answer(const std::string& request) const {
-        const test::Bio bio(BIO_new_mem_buf(request.data(), static_cast<int>(request.size())));
+        const test::BioHandle bio(BIO_new_mem_buf(request.data(), static_cast<int>(request.size())));
         X509_REQ* read = PEM_read_bio_X509_REQ(bio.get(), nullptr, nullptr, nullptr);
         EXPECT_EQ(X509_REQ_verify(read, X509_REQ_get0_pubkey(read)), 1);
         Data key(static_cast<std::size_t>(i2d_PUBKEY(X509_REQ_get0_pubkey(read), nullptr)));

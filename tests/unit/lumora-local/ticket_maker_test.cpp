@@ -154,7 +154,7 @@ std::size_t derLength(const Data& signature) {
 }
 
 bool verifies(const Container& parts, const std::string& certificate) {
-    const lumora::test::Certificate signer = lumora::test::certificateFromPem(certificate);
+    const lumora::test::CertificateHandle signer = lumora::test::certificateFromPem(certificate);
     EVP_MD_CTX* context = EVP_MD_CTX_new();
     EVP_DigestVerifyInit(context, nullptr, EVP_sha256(), nullptr, X509_get0_pubkey(signer.get()));
     const int result =
@@ -201,7 +201,7 @@ TEST_F(TicketSignerTest, ContainsItsChainLeafFirst) {
     const unsigned char* end = lumora::test::octets(parts.certificates) + parts.certificates.size();
     for (const Identity* identity :
          {&authority_.ticketSigner, &authority_.ticketIntermediate, &authority_.root}) {
-        const lumora::test::Certificate found(d2i_X509(nullptr, &at, end - at));
+        const lumora::test::CertificateHandle found(d2i_X509(nullptr, &at, end - at));
         ASSERT_NE(found, nullptr);
         EXPECT_EQ(X509_cmp(found.get(), lumora::test::certificateFromPem(identity->certificate).get()), 0);
     }
