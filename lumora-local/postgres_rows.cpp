@@ -28,13 +28,6 @@ constexpr const char* kInsertEvents =
     " SELECT * FROM unnest($1::bigint[], $2::bigint[], $3::bytea[], $4::text[], $5::text[], $6::text[],"
     " $7::bytea[], $8::text[], $9::bytea[], $10::text[], $11::text[], $12::text[])";
 
-template <class T>
-T knownName(const std::optional<T>& value, const char* column, const std::string& text) {
-    if (!value)
-        throw Failure(EX_CONFIG, foundation::format("record store: no %s is called %@", column, text));
-    return *value;
-}
-
 std::vector<CodeHash> readHashes(ByteView bytes, const std::string& name) {
     std::vector<CodeHash> hashes;
     try {

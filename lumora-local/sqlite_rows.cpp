@@ -10,14 +10,6 @@
 #include "lumora-local/store_rules.h"
 
 namespace pinwell::lumora {
-namespace {
-
-template <class T>
-T known(const std::optional<T>& value, const char* column, const std::string& text) {
-    if (!value)
-        throw Failure(EX_CONFIG, foundation::format("record store: no %s is called %@", column, text));
-    return *value;
-}
 
 foundation::Data bytesOf(const SQLite::Column& column) {
     const auto* bytes = static_cast<const std::byte*>(column.getBlob());
@@ -25,8 +17,6 @@ foundation::Data bytesOf(const SQLite::Column& column) {
                                     bytes == nullptr ? 0 : static_cast<std::size_t>(column.getBytes()));
     return foundation::toData(view);
 }
-
-}  // namespace
 
 int exitStatusOfSqlite(int code) noexcept {
     switch (code & 0xFF) {
@@ -56,11 +46,11 @@ Event readEvent(const SQLite::Statement& row) {
     Event event;
     event.time = foundation::Date{row.getColumn(0).getInt64()};
     event.actor = text(1);
-    event.action = known(parseAction(text(2)), "action", text(2));
-    event.environment = known(parseEnvironment(text(3)), "environment", text(3));
+    event.action = knownName(parseAction(text(2)), "action", text(2));
+    event.environment = knownName(parseEnvironment(text(3)), "environment", text(3));
     event.record = text(4);
     event.label = text(5);
-    if (!row.getColumn(6).isNull()) event.reason = known(parseReason(text(6)), "reason", text(6));
+    if (!row.getColumn(6).isNull()) event.reason = knownName(parseReason(text(6)), "reason", text(6));
     event.comment = text(7);
     event.ticket = text(8);
     event.previous = text(9);

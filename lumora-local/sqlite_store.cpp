@@ -36,12 +36,6 @@ std::string environmentText(Environment environment) {
     return std::string(toString(environment));
 }
 
-Data toData(const SQLite::Column& column) {
-    const auto* bytes = static_cast<const std::byte*>(column.getBlob());
-    const ByteView view(bytes, bytes == nullptr ? 0 : static_cast<std::size_t>(column.getBytes()));
-    return foundation::toData(view);
-}
-
 /// Ends a reused statement, which keeps its transaction open until then.
 class UnfinishedStatement {
   public:
@@ -130,7 +124,7 @@ std::vector<CodeHash> hashesOf(SQLite::Database& database, Environment environme
         database, "SELECT algorithm, hash FROM hash WHERE environment = ? AND name = ? ORDER BY position");
     row.bind(1, environmentText(environment));
     row.bind(2, name);
-    while (row.executeStep()) hashes.push_back({row.getColumn(0).getUInt(), toData(row.getColumn(1))});
+    while (row.executeStep()) hashes.push_back({row.getColumn(0).getUInt(), bytesOf(row.getColumn(1))});
     return hashes;
 }
 
@@ -214,7 +208,7 @@ std::optional<Delivery> SqliteStore::findTicket(Environment environment, const s
         if (!row.executeStep()) return std::nullopt;
         Delivery delivery;
         if (row.getColumn(0).isNull()) {
-            delivery.inlineTicket = toData(row.getColumn(2));
+            delivery.inlineTicket = bytesOf(row.getColumn(2));
         } else {
             delivery.asset = Delivery::Asset{row.getColumn(0).getString(),
                                              static_cast<std::uint64_t>(row.getColumn(1).getInt64())};
@@ -238,7 +232,7 @@ std::optional<Data> SqliteStore::findAsset(const std::string& identifier) {
         SQLite::Statement row(*database_, "SELECT ticket FROM record WHERE asset = ? LIMIT 1");
         row.bind(1, identifier);
         if (!row.executeStep()) return std::nullopt;
-        return toData(row.getColumn(0));
+        return bytesOf(row.getColumn(0));
     });
 }
 
@@ -361,7 +355,7 @@ void SqliteStore::walkHistory(const HistoryVisitor& visitor) {
             state.environment =
                 parseEnvironment(records.getColumn(0).getString()).value_or(Environment::production);
             state.name = records.getColumn(1).getString();
-            state.ticket = foundation::toHex(sha256(toData(records.getColumn(2))));
+            state.ticket = foundation::toHex(sha256(bytesOf(records.getColumn(2))));
             state.revoked = records.getColumn(3).getInt() != 0;
             if (!records.getColumn(4).isNull()) {
                 state.lastTicket = records.getColumn(4).getString();
@@ -388,7 +382,7 @@ void SqliteStore::walkContents(const ContentsVisitor& visitor) {
             const std::string text = records.getColumn(6).getString();
             const Environment environment = parseEnvironment(text).value_or(Environment::production);
             visitor.record(environment,
-                           {readRecord(*database_, environment, records), toData(records.getColumn(5))});
+                           {readRecord(*database_, environment, records), bytesOf(records.getColumn(5))});
         }
     });
 }

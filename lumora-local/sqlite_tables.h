@@ -9,6 +9,7 @@
 #include "lumora-local/record_store.h"
 
 namespace SQLite {
+class Column;
 class Database;
 class Statement;
 }  // namespace SQLite
@@ -35,6 +36,9 @@ int exitStatusOfSqlite(int code) noexcept;
 /// from the first column on. Throws Failure (EX_CONFIG) for an action, an environment or a reason that is not
 /// one.
 Event readEvent(const SQLite::Statement& row);
+
+/// Empty for NULL.
+foundation::Data bytesOf(const SQLite::Column& column);
 
 inline constexpr const char* kEventColumns =
     "time, actor, action, environment, record, label, reason, comment, ticket, previous, hash";

@@ -5,6 +5,8 @@
 #include <string>
 #include <vector>
 
+#include "foundation/format.h"
+#include "lumora-local/failure.h"
 #include "lumora-local/record_store.h"
 
 namespace pinwell::lumora {
@@ -84,5 +86,13 @@ class EventPageMaker {
     EventCursor last_;
     std::size_t read_ = 0;
 };
+
+/// The action, environment or reason that a row names. Throws Failure (EX_CONFIG) if it is not one.
+template <class T>
+T knownName(const std::optional<T>& value, const char* column, const std::string& text) {
+    if (!value)
+        throw Failure(EX_CONFIG, foundation::format("record store: no %s is called %@", column, text));
+    return *value;
+}
 
 }  // namespace pinwell::lumora
