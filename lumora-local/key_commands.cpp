@@ -266,15 +266,14 @@ RotationReport certifySignerElsewhere(const ServiceDirectory& directory, const s
 namespace {
 
 constexpr mode_t kFolderMode = 0700;
-constexpr mode_t kCertificateMode = 0644;
-constexpr mode_t kKeyMode = 0600;
 
 /// Certificate and key under these names, both or none.
 void writePair(const std::string& folder, const std::string& name, const Identity& identity) {
     PendingDirectory pending(folder, kFolderMode);
     writeNewFile(pending.path() + "/" + name + ".pem", foundation::asBytes(identity.certificate),
-                 kCertificateMode);
-    writeNewFile(pending.path() + "/" + name + ".key", foundation::asBytes(identity.privateKey), kKeyMode);
+                 kCertificateFileMode);
+    writeNewFile(pending.path() + "/" + name + ".key", foundation::asBytes(identity.privateKey),
+                 kKeyFileMode);
     flushDirectory(pending.path());
     pending.publish();
 }

@@ -1,14 +1,18 @@
-// SHA-256 and SHA-1 (FIPS 180-4).
+// The digests of this folder by their short names.
 #pragma once
 
-#include "foundation/bytes.h"
+#include "crypto/crypto.h"
 
 namespace pinwell::lumora {
 
 /// 32 bytes. Throws std::bad_alloc if the cryptographic library fails.
-foundation::Data sha256(foundation::ByteView bytes);
+inline foundation::Data sha256(foundation::ByteView bytes) {
+    return crypto::digestOf(crypto::Digest::sha256, bytes);
+}
 
 /// 20 bytes. Throws as sha256().
-foundation::Data sha1(foundation::ByteView bytes);
+inline foundation::Data sha1(foundation::ByteView bytes) {
+    return crypto::digestOf(crypto::Digest::sha1, bytes);
+}
 
 }  // namespace pinwell::lumora
