@@ -185,7 +185,7 @@ TEST_F(AdminPage, LeadsFromTheSearchToTheHistoryOfARecord) {
                 Each(testing::AnyOf("/", "/style.css", "/favicon.ico", StartsWith("/records"))));
 }
 
-TEST_F(AdminPage, IsForClientsThatMayReadAndHaveACertificate) {
+TEST_F(AdminPage, IsRefusedWithoutACertificateAndTheRoleToRead) {
     EXPECT_EQ(bridgeOf("ci.example")->ask("/")->status, 403);
     EXPECT_EQ(bridge->ask("/")->status, 200);
     httplib::SSLClient nobody("127.0.0.1",
@@ -194,7 +194,7 @@ TEST_F(AdminPage, IsForClientsThatMayReadAndHaveACertificate) {
     EXPECT_FALSE(nobody.Get("/"));
 }
 
-TEST_F(AdminPage, RunsNothingAndLoadsNothingWhateverLabelsAre) {
+TEST_F(AdminPage, RunsAndLoadsNothingForAnyLabel) {
     const std::string markup = "<script>document.title='run'</script><img src=\"/loaded\">";
     const std::string name = issue(markup + "\"'><b onclick=1>");
     for (const std::string& target : {std::string("/records"), "/records/" + name}) {

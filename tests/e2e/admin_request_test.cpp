@@ -62,7 +62,7 @@ TEST_F(AdminRequest, GetsTicketsThatStapleAndValidate) {
     EXPECT_THAT(request("ci.example", {"--json", samples[0]}).output, HasSubstr(R"("action":"reissued")"));
 }
 
-TEST_F(AdminRequest, RequestsTheHashesThatTheServiceWouldHaveFound) {
+TEST_F(AdminRequest, RequestsTheHashesThatIssuingFinds) {
     ASSERT_EQ(request("ci.example", samples).exitStatus, 0);
     const std::string requested = hashes();
     record("issue", samples);
@@ -70,7 +70,7 @@ TEST_F(AdminRequest, RequestsTheHashesThatTheServiceWouldHaveFound) {
     EXPECT_EQ(linesOf(requested).size(), samples.size());
 }
 
-TEST_F(AdminRequest, OfAClientWithoutTheRoleIsRefusedAndNoted) {
+TEST_F(AdminRequest, IsRefusedAndLoggedForAClientWithoutTheRole) {
     const ProcessResult result = request("reader.example", {samples[0]});
     EXPECT_EQ(result.exitStatus, 65);
     EXPECT_THAT(result.output, HasSubstr("403 (forbidden): access.toml does not give reader.example the role "
@@ -92,7 +92,7 @@ TEST_F(AdminRequest, ReinstatesARevokedRecordOnlyForAClientThatMayRevoke) {
     EXPECT_EQ(log().back(), "release.example reinstated");
 }
 
-TEST_F(AdminRequest, OfAClientOfAnotherAuthorityEndsWith68) {
+TEST_F(AdminRequest, EndsWith68ForAClientOfAnotherAuthority) {
     ChainFields fields = ServerChain("ci.example");
     fields.leaf.subject = commonName("ci.example");
     fields.leaf.extendedKeyUsage = "clientAuth";
@@ -104,7 +104,7 @@ TEST_F(AdminRequest, OfAClientOfAnotherAuthorityEndsWith68) {
     EXPECT_THAT(log(), testing::IsEmpty());
 }
 
-TEST_F(AdminRequest, ToAServiceThatIsDownEndsWith68) {
+TEST_F(AdminRequest, EndsWith68IfTheServiceIsDown) {
     serving->sendSignal(SIGTERM);
     serving->wait();
     const ProcessResult result = request("ci.example", withSamples({"--json", "--retries", "1"}));

@@ -41,7 +41,7 @@ class LocalService : public LocalServiceTest {
     }
 };
 
-TEST_F(LocalService, FromASampleToItsRevocation) {
+TEST_F(LocalService, IssuesStaplesAndRevokesASample) {
     record("issue", {bundle});
     serveRecords();
     EXPECT_THAT(validate(),
@@ -56,7 +56,7 @@ TEST_F(LocalService, FromASampleToItsRevocation) {
     EXPECT_EQ(stapled(), kept);
 }
 
-TEST_F(LocalService, ARevokedArtefactCanBeReinstated) {
+TEST_F(LocalService, ReinstatesARevokedArtefact) {
     serveRecords();
     record("issue", {bundle});
     record("revoke", {bundle});
@@ -134,7 +134,7 @@ TEST_F(LocalService, IsNotTrustedByAnotherPlatform) {
     EXPECT_THAT(staple(), Ended(68, Contains("Could not establish secure connection to 127.0.0.1")));
 }
 
-TEST_F(LocalService, ThatHasStoppedCannotBeReached) {
+TEST_F(LocalService, IsUnreachableAfterItsStop) {
     record("issue", {bundle});
     serveRecords();
     EXPECT_THAT(staple(), Stapled());

@@ -67,13 +67,13 @@ class Sample : public LocalServiceTest {
     const std::string& package() const { return samples.at(3); }
 };
 
-TEST_F(Sample, IsThereForEveryKindOfArtefact) {
+TEST_F(Sample, ExistsForEveryKindOfArtefact) {
     const std::string in = directory / "samples/";
     EXPECT_THAT(samples,
                 ElementsAre(in + "Sample.app", in + "Sample.dmg", in + "Unsigned.dmg", in + "Sample.pkg"));
 }
 
-TEST_F(Sample, GoesFromNoTicketToARevokedOne) {
+TEST_F(Sample, GetsATicketAndThenARevokedOne) {
     record("issue", samples);
     serveRecords();
     for (const std::string& path : samples) {
@@ -102,7 +102,7 @@ TEST_F(Sample, IsStapledAgainWithATicketThatIsDeliveredAsAnAsset) {
     }
 }
 
-TEST_F(Sample, OfAnImageIsReadByOthersBeforeAndAfter) {
+TEST_F(Sample, IsAnImageForOtherReadersBeforeAndAfter) {
     for (const std::string& path : {signedImage(), unsignedImage()}) {
         const std::string before = readFile(path);
         const std::size_t dataEnd = before.find("</plist>");  // a code signature would follow here
@@ -125,7 +125,7 @@ TEST_F(Sample, OfAnImageIsReadByOthersBeforeAndAfter) {
     }
 }
 
-TEST_F(Sample, OfAPackageIsReadByOthersBeforeAndAfter) {
+TEST_F(Sample, IsAPackageForOtherReadersBeforeAndAfter) {
     const std::string before = readFile(package());
     EXPECT_THAT(tool("7z", {"t", package()}).output, Not(HasSubstr(kDataBehindTheArchive)));
     isReadByOthers("before");
@@ -137,7 +137,7 @@ TEST_F(Sample, OfAPackageIsReadByOthersBeforeAndAfter) {
     isReadByOthers("after");
 }
 
-TEST_F(Sample, OfAPackageCarriesASignatureThatVerifies) {
+TEST_F(Sample, IsAPackageWithASignatureThatVerifies) {
     // The checksum is first in the heap and the signature follows it, both at the places in the table of
     // contents.
     const std::string contents = readFile(package());

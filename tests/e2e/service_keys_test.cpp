@@ -33,7 +33,7 @@ class ServiceKeys : public LocalServiceTest {
     }
 };
 
-TEST_F(ServiceKeys, TicketsOfAReplacedSignerStayGenuine) {
+TEST_F(ServiceKeys, KeepTicketsOfAReplacedSignerGenuine) {
     record("issue", {bundle});
     serveRecords();
     EXPECT_THAT(staple(), Stapled(bundle));
@@ -52,7 +52,7 @@ TEST_F(ServiceKeys, TicketsOfAReplacedSignerStayGenuine) {
     EXPECT_EQ(validate().exitStatus, 77);
 }
 
-TEST_F(ServiceKeys, ClientsFollowTheServerToItsNextKey) {
+TEST_F(ServiceKeys, LetClientsFollowTheServerToItsNextKey) {
     record("issue", {bundle});
     serveRecords();
     record("rotate", {"server"});
@@ -63,7 +63,7 @@ TEST_F(ServiceKeys, ClientsFollowTheServerToItsNextKey) {
     EXPECT_EQ(lumora({"check", serviceDirectory}).exitStatus, 0);
 }
 
-TEST_F(ServiceKeys, ThatAreEncryptedServeAndSign) {
+TEST_F(ServiceKeys, ServeAndSignIfEncrypted) {
     serviceDirectory = directory / "encrypted";
     writeFile(directory / "words", std::string_view("correct horse\n"));
     const ProcessResult init = lumora({"init", serviceDirectory, "--host", "127.0.0.1", "--passphrase-file",
@@ -138,7 +138,7 @@ TEST_F(TokenKeys, SignTickets) {
     EXPECT_EQ(validate().exitStatus, 77);
 }
 
-TEST_F(TokenKeys, GiveWayToAKeyInAFile) {
+TEST_F(TokenKeys, CanBeReplacedByAKeyInAFile) {
     ASSERT_EQ(rotateTo(uri()).exitStatus, 0);
     record("issue", {bundle});
     serveRecords();
@@ -148,7 +148,7 @@ TEST_F(TokenKeys, GiveWayToAKeyInAFile) {
     EXPECT_EQ(lumora({"check", serviceDirectory}).exitStatus, 0);
 }
 
-TEST_F(TokenKeys, ThatCannotBeUsedAreOneLine) {
+TEST_F(TokenKeys, AreReportedInOneLineIfUnusable) {
     writeFile(directory / "wrong-pin", std::string_view("4321\n"));
     const std::string before = readFile(inService("service.json"));
     expectRefusal(rotateTo("pkcs11:token=lumora;object=signer?pin-value=1234"), "holds a PIN");
@@ -168,7 +168,7 @@ TEST_F(TokenKeys, ThatCannotBeUsedAreOneLine) {
     EXPECT_EQ(readFile(inService("service.json")), before);
 }
 
-TEST_F(TokenKeys, ThatDoNotFitTheCertificateSignNothing) {
+TEST_F(TokenKeys, SignNothingIfTheyDoNotFitTheCertificate) {
     ASSERT_EQ(rotateTo(uri()).exitStatus, 0);
     importKey("second", "02", directory / "other/service/root.key");
     std::string settings = readFile(inService("service.json"));
