@@ -24,8 +24,8 @@ PolicyRef found(const std::string& sort) {
     return lookUp(sort).value_or(nullptr);
 }
 
-const std::optional<PolicyRef> kUnavailable = std::nullopt;
-const std::optional<PolicyRef> kRefused = PolicyRef();
+const std::optional<PolicyRef> kUnavailablePolicy = std::nullopt;
+const std::optional<PolicyRef> kRefusedPolicy = PolicyRef();
 
 /// The emulator is empty unless the tests are compiled for another processor.
 std::string probe(const std::string& directory) {
@@ -60,21 +60,21 @@ TEST(NamedPolicy, JudgesChains) {
 }
 
 TEST(NamedPolicy, OfAnAbsentLibraryIsUnavailable) {
-    EXPECT_EQ(lookUp("absent"), kUnavailable);
+    EXPECT_EQ(lookUp("absent"), kUnavailablePolicy);
 }
 
 TEST(NamedPolicy, ThatTheLibraryDoesNotKnowIsUnavailable) {
-    EXPECT_EQ(lookUp("nameless"), kUnavailable);
+    EXPECT_EQ(lookUp("nameless"), kUnavailablePolicy);
 }
 
 TEST(NamedPolicy, ThatIsNullIsARefusal) {
-    EXPECT_EQ(lookUp("refusing"), kRefused);
+    EXPECT_EQ(lookUp("refusing"), kRefusedPolicy);
 }
 TEST(NamedPolicy, OfAnotherVersionIsARefusal) {
-    EXPECT_EQ(lookUp("future"), kRefused);
+    EXPECT_EQ(lookUp("future"), kRefusedPolicy);
 }
 TEST(NamedPolicy, WithAValueOfUnknownTypeIsARefusal) {
-    EXPECT_EQ(lookUp("wrong_type"), kRefused);
+    EXPECT_EQ(lookUp("wrong_type"), kRefusedPolicy);
 }
 
 TEST(NamedPolicy, WithAnUnknownOptionTrustsNothing) {
