@@ -60,6 +60,7 @@ void writeText(const std::string& text) {
 }
 
 void writePart(std::string_view text) {
+    if (text.empty()) return;  // its data may be null, which fwrite does not allow
     if (std::fwrite(text.data(), 1, text.size(), stdout) != text.size()) {
         throw Failure(EX_IOERR, "cannot write to standard output");
     }

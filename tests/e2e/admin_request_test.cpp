@@ -1,5 +1,6 @@
 // pinwell-ticket request against the real service: tickets, refusals and the log.
 #include <csignal>
+#include <stdexcept>
 
 #include "admin_service.h"
 #include "foundation/json.h"
@@ -24,21 +25,28 @@ class AdminRequest : public AdminServiceTest {
         serve();
     }
 
+    /// The output of a command as JSON.
+    Value json(const std::string& command) const {
+        const std::string text = lumora({command, serviceDirectory, "--json"}).output;
+        const auto document = foundation::parseJSON(foundation::asBytes(text));
+        if (!document) throw std::runtime_error(command + " printed no JSON: " + text);
+        return *document;
+    }
+
     /// The log's actions, with their actors.
     std::vector<std::string> log() const {
-        const auto document =
-            foundation::parseJSON(foundation::asBytes(lumora({"log", serviceDirectory, "--json"}).output));
+        const Value document = json("log");
         std::vector<std::string> lines;
-        for (const Value& event : *(*document)["events"].array())
+        for (const Value& event : *document["events"].array())
             lines.push_back(*event["actor"].string() + " " + *event["action"].string());
         return lines;
     }
+
     /// The hashes of each record, in the order of the records.
     std::string hashes() const {
-        const auto list =
-            foundation::parseJSON(foundation::asBytes(lumora({"list", serviceDirectory, "--json"}).output));
+        const Value list = json("list");
         std::string all;
-        for (const Value& record : *(*list)["records"].array()) {
+        for (const Value& record : *list["records"].array()) {
             all += *record["recordName"].string() + ":";
             for (const Value& one : *record["hashes"].array()) all += " " + *one["hash"].string();
             all += "\n";
