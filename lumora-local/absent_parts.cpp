@@ -6,7 +6,7 @@
 
 namespace pinwell::lumora {
 
-#if PINWELL_WITHOUT_METRICS
+#if !PINWELL_HAS_METRICS
 void requireMetrics() {
     throw Failure(EX_CONFIG, "cannot offer metrics: this program was built without them");
 }
@@ -17,7 +17,7 @@ std::string describeMetrics(const ServiceCounts::Snapshot&, const ServiceFacts&)
 }
 #endif
 
-#if PINWELL_WITHOUT_PKCS11
+#if !PINWELL_HAS_PKCS11
 std::unique_ptr<DigestSigner> openTokenKey(const std::string& uri) {
     throw Failure(EX_CONFIG, foundation::format("cannot use %@: this program was built without PKCS #11",
                                                 uri.substr(0, uri.find('?'))));
