@@ -25,7 +25,7 @@ constexpr std::size_t kMaximumIdentifierLength = 1024;
 
 constexpr std::uint32_t kRequiredValidityFlags = kDoNotValidateExecutable | kDoNotValidateResources;
 
-/// Runs `body`; turns its exceptions into the status that they stand for.
+/// Runs `body`, and returns an error with the matching status if it throws.
 template <class Body>
 auto guarded(Body body) -> decltype(body()) {
     try {
