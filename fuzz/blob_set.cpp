@@ -2,8 +2,9 @@
 #include <algorithm>
 
 #include "codesign/code_signing.h"
+#include "formats/superblob.h"
 #include "foundation/byte_reader.h"
-#include "src/PWHashedFile/blob_set.h"
+#include "src/messages.h"
 #include "target.h"
 
 namespace pinwell::fuzz {
@@ -29,7 +30,7 @@ bool isTicket(const BlobRecord& record) {
 }
 
 Data superblobOf(const BlobSet& blobs, ByteView ticket) {
-    return foundation::toData(superblobWithTicket(blobs, ticket).view());
+    return foundation::toData(superblobWithTicket(blobs, ticket, 0, noisyDiagnostics()).view());
 }
 
 }  // namespace
@@ -38,7 +39,7 @@ void examine(ByteView input) {
     discardMessages();
     if (input.size() < kSuperblobHeaderSize) return;
     const Header header = headerOf(input);
-    const auto blobs = orderedBlobSetForSuperBlob(input, header.count);
+    const auto blobs = orderedBlobSetForSuperBlob(input, header.count, noisyDiagnostics());
     if (!blobs) return;
     require(blobs->size() <= header.count, "no more blobs than were counted");
     for (const BlobRecord& record : *blobs) {
@@ -56,7 +57,7 @@ void examine(ByteView input) {
 
     const Data ticket = foundation::toData("ticket");
     const Data stapled = superblobOf(*blobs, ticket);
-    const auto again = orderedBlobSetForSuperBlob(stapled, headerOf(stapled).count);
+    const auto again = orderedBlobSetForSuperBlob(stapled, headerOf(stapled).count, noisyDiagnostics());
     require(again && std::ranges::count_if(*again, isTicket) == 1, "there is one ticket afterwards");
     require(std::ranges::equal(again->back().data.subspan(kBlobHeaderSize), ticket), "the ticket reads back");
     require(superblobOf(*again, {}) == rebuilt, "without its ticket it is what it was");

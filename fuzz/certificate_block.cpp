@@ -2,7 +2,7 @@
 // service, which has no anchors.
 #include <memory>
 
-#include "src/satchel_internal.h"
+#include "formats/satchel.h"
 #include "target.h"
 #include "trust/certificate.h"
 #include "trust/der.h"

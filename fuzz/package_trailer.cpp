@@ -1,5 +1,5 @@
 // The trailers after a package's archive: found, and a ticket stapled among them.
-#include "src/PWHashedFile/package_trailer.h"
+#include "formats/package_trailers.h"
 
 #include <algorithm>
 #include <filesystem>

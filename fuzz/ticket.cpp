@@ -1,9 +1,9 @@
 // A ticket container and its payload; the input is the container. A payload by itself is read as well.
 #include <algorithm>
 
+#include "formats/satchel.h"
+#include "formats/tm_ticket.h"
 #include "foundation/byte_writer.h"
-#include "src/satchel.h"
-#include "src/tm_ticket.h"
 #include "support/fake_trust_service.h"
 #include "target.h"
 

@@ -77,7 +77,7 @@ bool Case::open() {
 }
 
 bool Case::judgeStapled() {
-    placeFault_ = explainTicketPlace(*file_, judgement_.platform.files);
+    placeFault_ = file_->ticketPlaceFault();
     // The tool stops here: such a file has no hash and no ticket.
     if (file_->appropriateExitCode() != kExitOK) return false;
     codeHash_ = file_->cdHash();

@@ -10,11 +10,11 @@
 #include <optional>
 #include <string>
 
+#include "formats/explain_ticket.h"
 #include "foundation/bytes.h"
 #include "gate/run.h"
 #include "retrieval/ticket_fetch.h"
 #include "src/PWHashedFile/PWHashedFile.h"
-#include "src/PWHashedFile/ticket_place.h"
 #include "src/platform.h"
 #include "verify/judged_ticket.h"
 #include "verify/verify.h"

@@ -5,7 +5,8 @@
 #include <system_error>
 #include <utility>
 
-#include "codesign/superblob.h"
+#include "formats/package_trailers.h"
+#include "formats/tm_ticket.h"
 #include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "inspect/gather_ticket.h"
@@ -13,9 +14,6 @@
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "src/PWHashedFile/file_kind.h"
-#include "src/PWHashedFile/held_ticket.h"
-#include "src/PWHashedFile/package_trailer.h"
-#include "src/PWHashedFile/trailer_window.h"
 #include "src/ticket_record.h"
 
 namespace pinwell::inspect {
@@ -48,84 +46,29 @@ std::optional<Fault> faultOf(const std::optional<TicketPlaceFault>& fault) {
     return Fault{fault->rule, std::nullopt, fault->offset};
 }
 
-/// Walks a package's trailers, past the first ticket and past damaged records, to the terminator.
-class TrailerWalk {
-  public:
-    TrailerWalk(files::FileHandle& file, TrailerPlace& into) : file_(file), window_(file), into_(into) {}
+Trailer shown(const surveyed_trailer& trailer) {
+    Trailer made{.recordOffset = trailer.recordOffset,
+                 .version = trailer.record.version(),
+                 .type = trailer.record.type(),
+                 .data = {},
+                 .problem = trailer.fault ? trailer.fault->rule : ""};
+    if (trailer.dataOffset) made.data = {*trailer.dataOffset, trailer.record.length()};
+    return made;
+}
 
-    void run() {
-        std::uint64_t position = file_.seekToEnd();
-        while (position >= kTrailerSize) {
-            const std::optional<std::uint64_t> next = step(position);
-            if (!next) return;
-            position = *next;
-        }
-    }
-
-    /// The first ticket from the end; only this one counts.
-    const std::optional<Range>& ticket() const { return ticket_; }
-
-    /// As explainTicketPlace() would find it, which collects the trailers too.
-    std::optional<TicketPlaceFault> fault() const {
-        if (fault_ || !ticket_) return fault_;
-        const auto fault = faultOfTicketLength(ticket_->length, ticket_->offset);
-        return fault ? std::optional(TicketPlaceFault{fault->rule, fault->offset}) : std::nullopt;
-    }
-
-  private:
-    std::optional<std::uint64_t> step(std::uint64_t position) {
-        const std::uint64_t recordOffset = position - kTrailerSize;
-        const ByteView bytes = window_.readAt(recordOffset, kTrailerSize);
-        if (bytes.size() != kTrailerSize) return std::nullopt;
-        trailer_header record;
-        std::copy(bytes.begin(), bytes.end(), record.bytes.begin());
-
-        Trailer found{.recordOffset = recordOffset,
-                      .version = record.version(),
-                      .type = record.type(),
-                      .data = {},
-                      .problem = {}};
-        if (const auto fault = faultOfTrailer(record, recordOffset)) {
-            found.problem = fault->rule;
-        } else if (!trailer_data_is_valid(bytes, nullptr)) {
-            return std::nullopt;
-        }
-        if (trailer_is_terminator(record.firstWord(), record.length())) {
-            into_.hasTerminator = true;
-            found.data = {recordOffset, 0};
-            keep(std::move(found));
-            return std::nullopt;
-        }
-        if (record.length() > recordOffset) {
-            keep(std::move(found));
-            return std::nullopt;
-        }
-        found.data = {recordOffset - record.length(), record.length()};
-        const bool isTicket = found.type == kTicketTrailerType;
-        const Range data = found.data;
-        keep(std::move(found));
-        if (isTicket && !ticket_) ticket_ = data;
-        return data.offset;
-    }
-
-    void keep(Trailer trailer) {
-        // The tool stops at the ticket; faults beyond it are only shown.
-        if (!trailer.problem.empty() && !fault_ && !ticket_)
-            fault_ = TicketPlaceFault{trailer.problem, trailer.recordOffset};
-        ++into_.trailerCount;
-        if (into_.trailers.size() < kMaximumTrailersKept) into_.trailers.push_back(std::move(trailer));
-    }
-
-    files::FileHandle& file_;
-    TrailerWindow window_;
-    TrailerPlace& into_;
-    std::optional<Range> ticket_;
-    std::optional<TicketPlaceFault> fault_;
-};
+/// The trailers, past the first ticket and past damaged records.
+package_trailer_survey gatherTrailers(files::FileReader& file, TrailerPlace& into) {
+    const package_trailer_survey survey = surveyPackageTrailers(file, [&](const surveyed_trailer& trailer) {
+        ++into.trailerCount;
+        if (into.trailers.size() < kMaximumTrailersKept) into.trailers.push_back(shown(trailer));
+    });
+    into.hasTerminator = survey.hasTerminator;
+    return survey;
+}
 
 /// The ticket's bytes within a superblob: the last ticket counts, as in the tool.
 std::optional<Range> ticketIn(ByteView superblob) {
-    const auto blob = codesign::surveyLastBlobOf(kTicketSlotType, superblob);
+    const auto blob = surveyLastBlobOf(kTicketSlotType, superblob);
     if (!blob || blob->bytes.size() < kBlobHeaderSize) return std::nullopt;
     return Range{blob->offset + std::uint64_t{kBlobHeaderSize}, blob->bytes.size() - kBlobHeaderSize};
 }
@@ -185,7 +128,7 @@ std::optional<TicketPlaceFault> Inspector::gatherBundle(const URL& url, Report& 
     report.code = codesign::describeCode(url.path());
     PWHashedBundle bundle(url, platform_);
     setHash(bundle, report);
-    const auto fault = explainTicketPlace(bundle, platform_.files);
+    const auto fault = bundle.ticketPlaceFault();
     if (report.kind == Kind::executable) return fault;
     report.place = FilePlace{bundle.codeResourcesURL().path(), faultOf(fault)};
     if (const auto bytes = bundle.ticketData()) gatherHeldTicket(*bytes, 0, report);
@@ -202,7 +145,7 @@ std::optional<TicketPlaceFault> Inspector::gatherImage(const URL& url, Report& r
         report.isMadeUpHash = report.codeHash && !isSigned;
     }
 
-    const auto fault = explainTicketPlace(image, platform_.files);
+    const auto fault = image.ticketPlaceFault();
     SuperblobPlace place;
     place.trailerOffset = image.origEOF() < kUDIFHeaderSize ? 0 : image.origEOF() - kUDIFHeaderSize;
     place.fault = faultOf(fault);
@@ -230,12 +173,11 @@ std::optional<TicketPlaceFault> Inspector::gatherPackage(const URL& url, Report&
     const auto file = platform_.files.openForReading(url);
     if (file) {
         try {
-            TrailerWalk walk(**file, place);
-            walk.run();
-            fault = walk.fault();
-            if (const auto& ticket = walk.ticket(); ticket && ticket->length > 0) {
-                (*file)->seek(ticket->offset);
-                gatherHeldTicket(files::readShared(**file, ticket->length), ticket->offset, report);
+            const package_trailer_survey survey = gatherTrailers(**file, place);
+            fault = placeFault(survey.fault);
+            if (survey.ticketStart && survey.ticketLength > 0) {
+                (*file)->seek(*survey.ticketStart);
+                gatherHeldTicket(files::readShared(**file, survey.ticketLength), *survey.ticketStart, report);
             }
         } catch (const files::FileHandleError& failure) {
             fault = TicketPlaceFault{std::string("the package cannot be read: ") + failure.what(), {}};

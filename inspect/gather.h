@@ -4,9 +4,9 @@
 #include <optional>
 #include <string>
 
+#include "formats/explain_ticket.h"
 #include "foundation/url.h"
 #include "inspect/report.h"
-#include "src/PWHashedFile/ticket_place.h"
 #include "src/platform.h"
 
 namespace pinwell::inspect {

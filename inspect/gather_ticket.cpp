@@ -3,11 +3,10 @@
 #include <algorithm>
 #include <utility>
 
+#include "formats/explain_ticket.h"
+#include "formats/satchel.h"
+#include "formats/tm_ticket.h"
 #include "foundation/value.h"
-#include "src/explain_ticket.h"
-#include "src/satchel.h"
-#include "src/satchel_internal.h"
-#include "src/tm_ticket.h"
 #include "trust/der.h"
 
 namespace pinwell::inspect {

@@ -3,8 +3,8 @@
 #include <nlohmann/json.hpp>
 #include <utility>
 
+#include "formats/superblob.h"
 #include "foundation/bytes.h"
-#include "src/PWHashedFile/blob_set.h"
 
 namespace pinwell::inspect {
 namespace {

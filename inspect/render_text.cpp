@@ -3,8 +3,8 @@
 #include <algorithm>
 #include <utility>
 
+#include "formats/superblob.h"
 #include "foundation/format.h"
-#include "src/PWHashedFile/blob_set.h"
 
 namespace pinwell::inspect {
 namespace {

@@ -2,9 +2,9 @@
 
 #include <sysexits.h>
 
+#include "formats/package_trailers.h"
 #include "foundation/date.h"
 #include "foundation/format.h"
-#include "src/PWHashedFile/package_trailer.h"
 
 namespace pinwell::inspect {
 

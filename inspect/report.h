@@ -11,8 +11,8 @@
 #include <vector>
 
 #include "codesign/code_description.h"
+#include "formats/explain_ticket.h"
 #include "foundation/bytes.h"
-#include "src/explain_ticket.h"
 #include "trust/certificate_description.h"
 
 namespace pinwell::inspect {

@@ -6,11 +6,10 @@
 #include <memory>
 #include <utility>
 
+#include "formats/explain_ticket.h"
 #include "library/c_calls.h"
 #include "library/local_platform.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
-#include "src/PWHashedFile/ticket_place.h"
-#include "src/explain_ticket.h"
 #include "src/record_name.h"
 #include "verify/check.h"
 #include "verify/judged_ticket.h"
@@ -110,7 +109,7 @@ class Assessor {
             return false;
         }
         file_ = std::move(opened.file);
-        placeFault_ = explainTicketPlace(*file_, services_.files);
+        placeFault_ = file_->ticketPlaceFault();
         kind_ = opened.kind;
         found_.kind = numberOf(kind_);
         return true;
@@ -215,7 +214,7 @@ verify::OpenedArtefact opened(const URL& url, const Platform& platform) {
 }
 
 LocatedTicket ticketOfBundle(PWHashedBundle& bundle, files::FileManager& files) {
-    const auto fault = explainTicketPlace(bundle, files);
+    const auto fault = bundle.ticketPlaceFault();
     if (fault && fault->isAbsence) throw Failure{PINWELL_ERROR_NO_TICKET, fault->rule};
     const URL url = bundle.codeResourcesURL();
     if (!files.isRegularFile(url)) throw Failure{PINWELL_ERROR_NO_TICKET, kNoTicket};

@@ -5,15 +5,12 @@
 #include <utility>
 
 #include "files/file_reader.h"
+#include "formats/disk_image.h"
+#include "formats/package_trailers.h"
+#include "formats/satchel.h"
+#include "formats/tm_ticket.h"
 #include "foundation/bytes.h"
 #include "foundation/error.h"
-#include "src/PWHashedFile/disk_image_signature.h"
-#include "src/PWHashedFile/held_ticket.h"
-#include "src/PWHashedFile/package_trailer_walk.h"
-#include "src/satchel.h"
-#include "src/satchel_internal.h"
-#include "src/ticket_fault.h"
-#include "src/tm_ticket.h"
 
 namespace pinwell::ticket {
 inline namespace v1 {
@@ -27,7 +24,7 @@ namespace {
 using files::FileReader;
 using Opened = foundation::Result<std::unique_ptr<FileReader>>;
 
-/// The parsers' own messages, which name the file, are for the tool's verbose mode.
+/// The parsers' diagnostics, which name the file, are for the tool's verbose mode.
 constexpr const char* kNoName = "";
 
 Error malformed(const ticket_fault& fault, std::uint64_t base = 0) {
@@ -78,14 +75,13 @@ Result<DiskImage> diskImageIn(FileReader& file) {
 
 Result<FlatPackage> flatPackageIn(FileReader& file) {
     FlatPackage package;
-    package_trailers read =
-        walkPackageTrailers(file, kNoName, [&](std::uint64_t recordOffset, const trailer_header& record) {
-            // A length that leads out of the file ends the walk with a fault; then this value is not
-            // returned.
-            const std::uint64_t length = record.length();
-            package.trailers.push_back(
-                {TrailerType{record.type()}, recordOffset, {recordOffset - length, length}});
-        });
+    package_trailers read = walkPackageTrailers(file, kNoName, [&](const surveyed_trailer& trailer) {
+        // Without data the walk ends with a fault, and this value is not returned.
+        if (trailer.dataOffset)
+            package.trailers.push_back({TrailerType{trailer.record.type()},
+                                        trailer.recordOffset,
+                                        {*trailer.dataOffset, trailer.record.length()}});
+    });
     if (read.fault) return malformed(*read.fault);
     package.fileSize = read.fileSize;
     package.hasTerminator = read.hasTerminator;

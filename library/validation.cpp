@@ -3,11 +3,11 @@
 #include <algorithm>
 #include <utility>
 
+#include "formats/explain_ticket.h"
+#include "formats/tm_ticket.h"
 #include "foundation/date.h"
 #include "foundation/platform_directory.h"
 #include "library/roots.h"
-#include "src/explain_ticket.h"
-#include "src/tm_ticket.h"
 #include "trust/certificate.h"
 #include "trust/trust_service.h"
 

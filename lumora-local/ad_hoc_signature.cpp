@@ -4,7 +4,7 @@
 #include <array>
 #include <utility>
 
-#include "formats/superblob_layout.h"
+#include "formats/superblob.h"
 #include "foundation/byte_writer.h"
 #include "foundation/format.h"
 #include "foundation/property_list.h"

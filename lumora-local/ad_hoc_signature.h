@@ -1,7 +1,7 @@
 // Signing ad hoc, for the samples: code signatures, the seal of a bundle's resources, and the property lists
 // of both.
 //
-// A code signature is a superblob (formats/superblob_layout.h) of three blobs: a SHA-256 code directory
+// A code signature is a superblob (formats/superblob.h) of three blobs: a SHA-256 code directory
 // (version 0x20400, one hash per page of 4096 bytes), an empty requirements blob, an empty CMS blob.
 //
 // A seal has the form of code signers: Contents/_CodeSignature/CodeResources. It is a property list of four

@@ -1,7 +1,7 @@
 #include "lumora-local/record_name.h"
 
+#include "formats/tm_ticket.h"
 #include "foundation/hex.h"
-#include "src/tm_ticket.h"
 
 namespace pinwell::lumora {
 std::optional<std::size_t> hashLength(std::uint32_t algorithm) {

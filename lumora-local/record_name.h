@@ -6,7 +6,7 @@
 #include <string>
 #include <string_view>
 
-#include "src/code_hashes.h"
+#include "formats/code_hashes.h"
 
 namespace pinwell::lumora {
 

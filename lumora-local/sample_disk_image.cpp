@@ -35,7 +35,7 @@
 #include <cstdint>
 #include <utility>
 
-#include "formats/udif_header.h"
+#include "formats/disk_image.h"
 #include "foundation/byte_writer.h"
 #include "lumora-local/ad_hoc_signature.h"
 #include "lumora-local/file_writing.h"

@@ -5,15 +5,14 @@
 #include <stdexcept>
 #include <utility>
 
+#include "formats/explain_ticket.h"
 #include "foundation/base64.h"
 #include "foundation/hex.h"
 #include "foundation/json.h"
 #include "foundation/value.h"
 #include "src/PWHashedFile/PWHashedFile.h"
-#include "src/explain_ticket.h"
 #include "src/messages.h"
 #include "src/ticket_record.h"
-#include "src/ticket_verdict.h"
 
 namespace pinwell::retrieval {
 namespace {

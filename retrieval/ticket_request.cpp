@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "codesign/code_directory.h"
+#include "formats/explain_ticket.h"
 #include "foundation/base64.h"
 #include "foundation/format.h"
 #include "foundation/json.h"

@@ -15,11 +15,11 @@
 #include <string_view>
 #include <vector>
 
+#include "formats/code_hashes.h"
 #include "foundation/url.h"
 #include "retrieval/connection.h"
 #include "retrieval/retry_policy.h"
 #include "retrieval/ticket_fetch.h"
-#include "src/code_hashes.h"
 #include "src/platform.h"
 
 namespace pinwell::retrieval {

@@ -2,8 +2,8 @@
 
 #include "src/DownloadDelegate.h"
 
+#include "formats/explain_ticket.h"
 #include "src/messages.h"
-#include "src/ticket_verdict.h"
 
 namespace pinwell {
 namespace {

@@ -3,9 +3,9 @@
 
 #include <vector>
 
+#include "formats/code_hashes.h"
 #include "foundation/url.h"
 #include "foundation/value.h"
-#include "src/code_hashes.h"
 #include "src/platform.h"
 
 namespace pinwell {

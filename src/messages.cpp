@@ -51,4 +51,8 @@ void writeMessageLine(std::string line) {
     }
 }
 
+Diagnostics noisyDiagnostics() {
+    return verboseLevel == kVerbosityVerbose ? Diagnostics(writeMessageLine) : Diagnostics();
+}
+
 }  // namespace pinwell

@@ -8,6 +8,7 @@
 #include <functional>
 #include <string>
 
+#include "formats/findings.h"
 #include "foundation/format.h"
 
 namespace pinwell {
@@ -54,5 +55,8 @@ void MessageLog(foundation::FormatString<std::type_identity_t<Args>...> format, 
     if (verboseLevel != kVerbosityQuiet || messagesAreRedirected())
         writeMessageLine(foundation::format(format, args...));
 }
+
+/// For a parser: its lines are diagnostic lines of this program, as by NoisyLog.
+Diagnostics noisyDiagnostics();
 
 }  // namespace pinwell

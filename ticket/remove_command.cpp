@@ -1,9 +1,9 @@
 // The command that removes tickets.
+#include "formats/package_trailers.h"
 #include "foundation/format.h"
 #include "retrieval/artefact_run.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
-#include "src/PWHashedFile/package_trailer.h"
 #include "src/messages.h"
 #include "src/run.h"
 #include "ticket/command_parts.h"
@@ -52,9 +52,10 @@ bool RemovablePackage::cutTerminatorToo(files::FileHandle& file) const {
     if (dataToAppend() || ticketStart() < kTrailerSize) return false;
     const std::uint64_t terminator = ticketStart() - kTrailerSize;
     file.seek(terminator);
+    const Diagnostics diagnostics = noisyDiagnostics();
     trailer_header record;
-    if (!trailer_data_is_valid(file.read(kTrailerSize), &record) ||
-        !trailer_is_terminator(record.firstWord(), record.length()))
+    if (!trailer_data_is_valid(file.read(kTrailerSize), &record, diagnostics) ||
+        !trailer_is_terminator(record.firstWord(), record.length(), diagnostics))
         return false;
     file.truncate(terminator);
     file.synchronize();

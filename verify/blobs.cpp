@@ -3,8 +3,8 @@
 
 #include "codesign/static_code.h"
 #include "codesign/superblob.h"
+#include "formats/superblob.h"
 #include "foundation/format.h"
-#include "src/PWHashedFile/blob_set.h"
 #include "verify/check.h"
 #include "verify/signature_parts.h"
 
@@ -19,17 +19,16 @@ constexpr std::uint32_t kFirstSlotOfNoComponent = 0x1000;
 
 /// The magic that a blob of this slot has; `nullopt` if any is allowed, because a digest covers it.
 std::optional<std::uint32_t> magicOf(std::uint32_t slot) {
-    if (slot == codesign::kSlotCodeDirectory || codesign::isAlternateSlot(slot))
-        return codesign::kCodeDirectoryMagic;
-    if (slot == codesign::kSlotRequirements) return kRequirementsMagic;
-    if (slot == codesign::kSlotCms) return kWrapperMagic;
+    if (slot == kSlotCodeDirectory || isAlternateSlot(slot)) return codesign::kCodeDirectoryMagic;
+    if (slot == kSlotRequirements) return kRequirementsMagic;
+    if (slot == kSlotCms) return kWrapperMagic;
     if (slot == kTicketSlotType) return kTicketBlobMagic;
     return std::nullopt;
 }
 
 /// Why nothing covers a blob; empty if something does.
 std::string faultOf(const codesign::Blob& blob, SignatureHost host) {
-    const bool isComponent = blob.slot != codesign::kSlotTrailer && blob.slot < kFirstSlotOfNoComponent;
+    const bool isComponent = blob.slot != kSlotTrailer && blob.slot < kFirstSlotOfNoComponent;
     const std::optional<std::uint32_t> magic = magicOf(blob.slot);
     if (!magic && !isComponent) return "a blob that nothing covers";
     if (blob.slot == kTicketSlotType && host != SignatureHost::diskImage)

@@ -1,7 +1,7 @@
 // A disk image's own checksums: a second check of its data, besides the hashes of its signature. All integers
 // are big-endian; a sector is 512 bytes.
 //
-// The trailer (formats/udif_header.h) gives the place of the data fork, with a checksum of its
+// The trailer (formats/disk_image.h) gives the place of the data fork, with a checksum of its
 // bytes, and the place of a property list. The list's resource-fork/blkx holds the tables:
 //
 // | Offset | Size | Field of a table                                                                |

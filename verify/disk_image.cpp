@@ -5,7 +5,7 @@
 #include "codesign/code_error.h"
 #include "codesign/static_code.h"
 #include "codesign/superblob.h"
-#include "formats/udif_header.h"
+#include "formats/disk_image.h"
 #include "foundation/bytes.h"
 #include "foundation/format.h"
 #include "verify/block_table.h"
@@ -43,8 +43,8 @@ void checkSigned(const ByteSource& source, const DiskImageTrailer& trailer, cons
     const FileRange code{0, area.offset};
     checkSigner(parts, kImagePlace, section);
     checkAgreement(parts, kImagePlace, section);
-    checkSpecialSlots(parts, {{codesign::kSlotTrailer, {.bytes = &canonical, .mustBeCovered = true}}},
-                      kImagePlace, section);
+    checkSpecialSlots(parts, {{kSlotTrailer, {.bytes = &canonical, .mustBeCovered = true}}}, kImagePlace,
+                      section);
     checkCodeLimit(parts, code.length, "the signature", kImagePlace, section);
     checkPageHashes(source, code, parts, kImagePlace, workers, section);
 }

@@ -2,10 +2,10 @@
 
 #include <algorithm>
 
+#include "formats/explain_ticket.h"
+#include "formats/satchel.h"
+#include "formats/tm_ticket.h"
 #include "foundation/format.h"
-#include "src/explain_ticket.h"
-#include "src/satchel.h"
-#include "src/tm_ticket.h"
 #include "verify/check.h"
 
 namespace pinwell::verify {

@@ -7,8 +7,8 @@
 #include <string>
 #include <unordered_set>
 
+#include "formats/explain_ticket.h"
 #include "foundation/bytes.h"
-#include "src/PWHashedFile/ticket_place.h"
 #include "trust/trust.h"
 #include "verify/check.h"
 #include "verify/code.h"

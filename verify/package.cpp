@@ -8,10 +8,10 @@
 #include <utility>
 
 #include "codesign/code_error.h"
+#include "formats/package_trailers.h"
 #include "foundation/byte_reader.h"
 #include "foundation/bytes.h"
 #include "foundation/format.h"
-#include "src/PWHashedFile/package_trailer_walk.h"
 #include "verify/archive_table.h"
 #include "verify/check.h"
 #include "verify/signature_parts.h"
@@ -39,16 +39,16 @@ std::optional<FileRange> inFile(const Archive& archive, const FileRange& range, 
     return FileRange{archive.heapStart + range.offset, range.length};
 }
 
-/// The first bytes of a source, as a file for the walk along the trailers.
-class StartOfSource final : public files::FileReader {
+/// A source, as a file for the walk along the trailers.
+class SourceReader final : public files::FileReader {
   public:
-    StartOfSource(const ByteSource& source, std::uint64_t end) : source_(source), end_(end) {}
+    explicit SourceReader(const ByteSource& source) : source_(source) {}
 
-    std::uint64_t seekToEnd() override { return position_ = end_; }
+    std::uint64_t seekToEnd() override { return position_ = source_.size(); }
     std::uint64_t seek(std::uint64_t position) override { return position_ = position; }
     std::uint64_t position() override { return position_; }
     Data read(std::uint64_t length) override {
-        const std::uint64_t rest = end_ - std::min(position_, end_);
+        const std::uint64_t rest = source_.size() - std::min(position_, source_.size());
         const auto count = static_cast<std::size_t>(std::min(length, rest));
         try {
             Data bytes = source_.read(position_, count);
@@ -61,11 +61,10 @@ class StartOfSource final : public files::FileReader {
 
   private:
     const ByteSource& source_;
-    const std::uint64_t end_;
     std::uint64_t position_ = 0;
 };
 
-/// Checks the bytes after the archive (src/PWHashedFile/package_trailer.h): none, or a terminator and one
+/// Checks the bytes after the archive (formats/package_trailers.h): none, or a terminator and one
 /// ticket.
 ///
 /// The tool skips trailers of other types and keeps them. Here they are faults, because nothing covers them.
@@ -77,7 +76,13 @@ class TrailerCheck {
 
     /// The end of the archive, where the trailers begin.
     std::uint64_t run() {
-        while (walkOnce()) {
+        SourceReader reader(source_);
+        try {
+            const package_trailer_survey survey =
+                surveyPackageTrailers(reader, [&](const surveyed_trailer& trailer) { visit(trailer); });
+            hasTerminator_ = survey.hasTerminator && !isBroken_;
+        } catch (const files::FileHandleError&) {
+            if (!isBroken_) fail(end_, kChain, "the trailers cannot be read");
         }
         if (end_ != source_.size() && !hasTerminator_)
             fail(end_, "a terminator between archive and trailers", "none");
@@ -85,26 +90,25 @@ class TrailerCheck {
     }
 
   private:
-    /// The tool's walk stops at the last ticket. Returns whether there may be more.
-    bool walkOnce() {
-        const std::uint64_t before = end_;
-        StartOfSource reader(source_, before);
-        const package_trailers walked = walkPackageTrailers(
-            reader, {},
-            [&](std::uint64_t recordOffset, const trailer_header& record) { visit(recordOffset, record); });
-        hasTerminator_ = walked.hasTerminator;
-        if (walked.fault) fail(walked.fault->offset, "a chain of trailers", walked.fault->rule);
-        return !walked.fault && !hasTerminator_ && end_ != before;
+    static constexpr const char* kChain = "a chain of trailers";
+
+    void visit(const surveyed_trailer& trailer) {
+        if (isBroken_) return;
+        if (trailer_data_is_valid(trailer.record.bytes, nullptr)) check(trailer);
+        if (trailer.fault) fail(trailer.fault->offset, kChain, trailer.fault->rule);
+        isBroken_ = trailer.fault.has_value();
     }
 
-    void visit(std::uint64_t recordOffset, const trailer_header& record) {
+    void check(const surveyed_trailer& trailer) {
         constexpr std::size_t kUpperHalf = 12;
+        const trailer_header& record = trailer.record;
         const ByteView unused = ByteView(record.bytes).subspan(kUpperHalf);
-        end_ = recordOffset - std::min<std::uint64_t>(record.length(), recordOffset);
+        end_ = trailer.dataOffset.value_or(0);
         if (std::any_of(unused.begin(), unused.end(), [](std::byte byte) { return byte != std::byte{0}; }))
-            fail(recordOffset + kUpperHalf, "zeros after the length", "other bytes");
+            fail(trailer.recordOffset + kUpperHalf, "zeros after the length", "other bytes");
         if (record.type() == kTerminatorTrailerType) {
-            if (record.length() != 0) fail(recordOffset, "a terminator without data", "one with data");
+            if (record.length() != 0)
+                fail(trailer.recordOffset, "a terminator without data", "one with data");
         } else if (record.type() != kTicketTrailerType) {
             fail(end_, "a ticket", format("a trailer of type %u, which nothing covers", record.type()));
         } else if (++tickets_ > 1) {
@@ -122,6 +126,7 @@ class TrailerCheck {
     std::uint64_t end_;
     std::size_t tickets_ = 0;
     bool hasTerminator_ = false;
+    bool isBroken_ = false;
 };
 
 /// Whether the header looks like an archive's, possibly a damaged one.

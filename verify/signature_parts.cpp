@@ -22,8 +22,7 @@ namespace {
 constexpr std::uint32_t kEndOfComponentSlots = 0x1000;
 
 bool isDirectorySlot(std::uint32_t slot) {
-    return slot == codesign::kSlotCodeDirectory ||
-           (slot >= codesign::kSlotFirstAlternate && slot <= codesign::kSlotLastAlternate);
+    return slot == kSlotCodeDirectory || isAlternateSlot(slot);
 }
 
 // CodeDirectory::parse has checked that these fields exist and refer to bytes in the blob.
@@ -71,7 +70,7 @@ ByteView Directory::codeDigest(std::uint32_t index) const {
 
 void SignatureParts::addDirectory(std::uint32_t slot, const codesign::SharedBytes& blob) {
     const bool isKnown = codesign::digestTypeNumbered(CodeDirectory::digestTypeNumberOf(blob)).has_value();
-    if (slot != codesign::kSlotCodeDirectory && !isKnown) return;
+    if (slot != kSlotCodeDirectory && !isKnown) return;
     Directory directory = withFields(slot, CodeDirectory::parse(blob));
     const auto sameType = [&](const Directory& other) {
         return other.content.digestType() == directory.content.digestType();
@@ -85,18 +84,18 @@ std::optional<SignatureParts> SignatureParts::fromSuperBlob(codesign::SharedByte
     SignatureParts parts;
     std::map<std::uint32_t, codesign::SharedBytes> directories;
     for (const codesign::Blob& blob : codesign::parseSuperBlob(superblob)) {
-        if (blob.slot == codesign::kSlotCms) {
+        if (blob.slot == kSlotCms) {
             if (blob.magic != kWrapperMagic) refuse("the CMS blob has a wrong magic");
             parts.cms_ = blob.bytes.subspan(kBlobHeaderSize);
         } else if (isDirectorySlot(blob.slot)) {
             directories.emplace(blob.slot, superblob.share(blob.bytes));
-        } else if (blob.slot < kEndOfComponentSlots && blob.slot != codesign::kSlotTrailer &&
+        } else if (blob.slot < kEndOfComponentSlots && blob.slot != kSlotTrailer &&
                    !parts.components_.emplace(blob.slot, blob.bytes).second) {
             refuse(format("two components in slot %u", blob.slot));
         }
     }
     if (directories.empty()) return std::nullopt;
-    if (directories.begin()->first != codesign::kSlotCodeDirectory)
+    if (directories.begin()->first != kSlotCodeDirectory)
         refuse("alternate code directories without a primary one");
     for (const auto& [slot, blob] : directories) parts.addDirectory(slot, blob);
     parts.storage_.push_back(std::move(superblob));
@@ -107,9 +106,9 @@ std::optional<SignatureParts> SignatureParts::fromSeparateFiles(
     codesign::SharedBytes directory, std::optional<codesign::SharedBytes> requirements,
     codesign::SharedBytes cms) {
     SignatureParts parts;
-    parts.addDirectory(codesign::kSlotCodeDirectory, directory);
+    parts.addDirectory(kSlotCodeDirectory, directory);
     if (requirements) {
-        parts.components_.emplace(codesign::kSlotRequirements, requirements->view());
+        parts.components_.emplace(kSlotRequirements, requirements->view());
         parts.storage_.push_back(*std::move(requirements));
     }
     parts.cms_ = cms.view();
@@ -139,19 +138,19 @@ std::string specialSlotName(std::uint32_t slot) {
         case kSlotPropertyList:
             what = "property list";
             break;
-        case codesign::kSlotRequirements:
+        case kSlotRequirements:
             what = "requirements";
             break;
         case kSlotResourceSeal:
             what = "sealed resources";
             break;
-        case codesign::kSlotEntitlements:
+        case kSlotEntitlements:
             what = "entitlements";
             break;
-        case codesign::kSlotTrailer:
+        case kSlotTrailer:
             what = "trailer";
             break;
-        case codesign::kSlotDerEntitlements:
+        case kSlotDerEntitlements:
             what = "entitlements in DER";
             break;
         default:

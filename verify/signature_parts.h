@@ -94,7 +94,7 @@ struct OutsideComponent {
 };
 using OutsideComponents = std::map<std::uint32_t, OutsideComponent>;
 
-/// The property list, the resource seal; the trailer is codesign::kSlotTrailer.
+/// The property list, the resource seal; the trailer is kSlotTrailer.
 inline constexpr std::uint32_t kSlotPropertyList = 1;
 inline constexpr std::uint32_t kSlotResourceSeal = 3;
 

@@ -23,12 +23,12 @@
 #include "codesign/byte_source.h"
 #include "codesign/code_signature.h"
 #include "codesign/executable_image.h"
-#include "formats/udif_header.h"
+#include "formats/disk_image.h"
 #include "foundation/places.h"
 
 namespace pinwell::codesign {
 
-/// A disk image's trailer (formats/udif_header.h), as far as its signature needs it. A value.
+/// A disk image's trailer (formats/disk_image.h), as far as its signature needs it. A value.
 class DiskImageTrailer {
   public:
     /// The trailer at the end of `source`; `nullopt` if there is none. Throws CodeError only if the bytes

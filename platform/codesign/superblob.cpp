@@ -37,40 +37,7 @@ void requireSeparate(std::vector<Range> ranges) {
     if (overlap != ranges.end()) refuse("blobs overlap");
 }
 
-SurveyedBlob surveyBlob(ByteView superblob, const BlobIndexEntry& entry) {
-    SurveyedBlob blob{.slot = entry.slot, .offset = entry.offset, .magic = {}, .length = {}, .bytes = {}};
-    if (entry.offset >= superblob.size()) return blob;
-    blob.bytes = superblob.subspan(entry.offset);
-    if (blob.bytes.size() < kBlobHeaderSize) return blob;
-    ByteReader reader(blob.bytes);
-    const BlobHeader header = readBlobHeader(reader);
-    blob.magic = header.magic;
-    blob.length = header.length;
-    blob.bytes = blob.bytes.first(std::min<std::size_t>(*blob.length, blob.bytes.size()));
-    return blob;
-}
-
-// Passes the entries of the index to `visit` while it returns true. Returns the stated count, or 0 without a
-// header.
-template <class Visit>
-std::uint32_t survey(ByteView superblob, Visit visit) {
-    std::uint32_t count = 0;
-    try {
-        ByteReader index(superblob);
-        count = readSuperblobHeader(index).count;
-        for (std::uint32_t i = 0; i < count; ++i)
-            if (!visit(surveyBlob(superblob, readBlobIndexEntry(index)))) break;
-    } catch (const foundation::ShortRead&) {
-        // A truncated entry is ignored.
-    }
-    return count;
-}
-
 }  // namespace
-
-bool isAlternateSlot(std::uint32_t slot) {
-    return slot >= kSlotFirstAlternate && slot <= kSlotLastAlternate;
-}
 
 bool isSlotOfSignature(std::uint32_t slot) {
     return slot == kSlotCodeDirectory || slot == kSlotRequirements || slot == kSlotEntitlements ||
@@ -105,24 +72,6 @@ std::vector<Blob> parseSuperBlob(ByteView superblob) {
     requireDistinctSlots(blobs);
     requireSeparate(std::move(ranges));
     return blobs;
-}
-
-std::vector<SurveyedBlob> surveySuperBlob(ByteView superblob, std::size_t maximum, std::uint32_t& count) {
-    std::vector<SurveyedBlob> blobs;
-    count = survey(superblob, [&](const SurveyedBlob& blob) {
-        blobs.push_back(blob);
-        return blobs.size() < maximum;
-    });
-    return blobs;
-}
-
-std::optional<SurveyedBlob> surveyLastBlobOf(std::uint32_t slot, ByteView superblob) {
-    std::optional<SurveyedBlob> last;
-    survey(superblob, [&](const SurveyedBlob& blob) {
-        if (blob.slot == slot && blob.magic) last = blob;
-        return true;
-    });
-    return last;
 }
 
 Data buildSuperBlob(const std::vector<std::pair<std::uint32_t, Data>>& blobs) {

@@ -19,6 +19,25 @@ std::optional<Data> PWHashedBundle::_ticketData() {
     return platform().files.contentsOfFile(ticket).asOptional();
 }
 
+std::optional<TicketPlaceFault> PWHashedBundle::ticketPlaceFault() {
+    files::FileManager& files = platform().files;
+    if (const auto isFile = files.isRegularFile(*fileURL()); isFile && *isFile)
+        return TicketPlaceFault{"an executable outside a bundle has no place for a ticket", std::nullopt,
+                                true};
+    const URL place = codeResourcesURL();
+    const auto isRegular = files.isRegularFile(place);
+    if (!isRegular) return std::nullopt;  // nothing is there
+    if (!*isRegular)
+        return TicketPlaceFault{"Contents/CodeResources is not a regular file", std::nullopt, true};
+    if (ticketData()) return std::nullopt;
+    const auto bytes = files.contentsOfFile(place);
+    if (bytes) return std::nullopt;  // an empty file
+    const std::string& reason = bytes.error().localizedFailureReason();
+    return TicketPlaceFault{
+        "the ticket file cannot be read: " + (reason.empty() ? bytes.error().localizedDescription() : reason),
+        std::nullopt};
+}
+
 std::optional<Data> PWHashedBundle::_cdHash() {
     const foundation::Value properties = basicCodeProperties(*fileURL(), platform());
     const auto algorithm = properties[kDigestAlgorithmKey].unsignedIntegerValue();

@@ -27,6 +27,8 @@ class PWHashedBundle : public PWHashedFile {
     /// code.
     bool _deleteExistingTicket();
 
+    std::optional<TicketPlaceFault> ticketPlaceFault() override;
+
     std::optional<Data> _ticketData() override;
     std::optional<Data> _cdHash() override;
 

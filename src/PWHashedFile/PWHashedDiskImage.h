@@ -1,14 +1,13 @@
 // UDIF disk images.
 //
 // The ticket is a blob of the code-signature superblob, which is between the image's data and its trailer
-// (disk_image_signature.h, blob_set.h). The data are never read or written here. An unsigned image gets its
-// superblob with its first ticket. It is identified by a synthetic cdhash (synthetic_cdhash.h), which the
-// ticket does not change.
+// (formats/disk_image.h). The data are never read or written here. An unsigned image gets its superblob with
+// its first ticket. It is identified by a synthetic cdhash, which the ticket does not change.
 #pragma once
 
+#include "formats/disk_image.h"
 #include "foundation/bytes.h"
 #include "src/PWHashedFile/PWHashedFile.h"
-#include "src/PWHashedFile/disk_image_signature.h"
 
 namespace pinwell {
 
@@ -33,8 +32,7 @@ class PWHashedDiskImage : public PWHashedFile {
 
     std::uint32_t numBlobs() const noexcept { return signature_.numBlobs; }
 
-    /// Why trailer or superblob is invalid, with the offset in the file; `nullopt` if both are valid.
-    const std::optional<ticket_fault>& fault() const noexcept { return signature_.fault; }
+    std::optional<TicketPlaceFault> ticketPlaceFault() override { return explainTicketPlace(signature_); }
 
     std::optional<Data> _ticketData() override;
     std::optional<Data> _cdHash() override;
@@ -61,5 +59,17 @@ class PWHashedDiskImage : public PWHashedFile {
     std::optional<Data> syntheticCDHash_;
     std::uint64_t endOfDMGData_ = 0;
 };
+
+/// The cdhash of a disk image without a signature. The code-signing service signs the whole file ad hoc, as
+/// opaque data, into memory; the cdhash of that signature is the image's. The same bytes always give the same
+/// cdhash, so a ticket for it can be issued, found and checked.
+///
+/// Writes the digest type and the cdhash of `fileURL` to the out-parameters that are not null; returns the
+/// platform's parameter error if both are null. Returns the status of the failed operation, or success. If
+/// the signature has no cdhash, it returns success and leaves the out-parameters unchanged. Reads the whole
+/// file, and never changes it.
+codesign::Status syntheticCDHashForURL(const foundation::URL& fileURL, const Platform& platform,
+                                       std::uint32_t* digestAlgorithm,
+                                       std::optional<foundation::Data>* cdHash);
 
 }  // namespace pinwell

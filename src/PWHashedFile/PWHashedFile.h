@@ -12,6 +12,7 @@
 #include <string>
 #include <string_view>
 
+#include "formats/explain_ticket.h"
 #include "foundation/bytes.h"
 #include "foundation/error.h"
 #include "foundation/url.h"
@@ -91,6 +92,10 @@ class PWHashedFile {
     /// The stapled ticket, and the cdhash; `nullopt` if there is none. Computed once, on first use.
     std::optional<Data> ticketData();
     std::optional<Data> cdHash();
+
+    /// The fault of the place of the ticket. `nullopt` if the place is sound, with a ticket or without. Reads
+    /// the ticket, and a bundle's ticket again if that fails.
+    virtual std::optional<TicketPlaceFault> ticketPlaceFault() { return std::nullopt; }
 
     /// Staples the ticket in the file at `source`.
     virtual bool writeNewTicketDataFromURL(const URL& source, ErrorOut error);

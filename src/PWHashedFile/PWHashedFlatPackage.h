@@ -1,13 +1,13 @@
 // Signed flat installer packages.
 //
-// The ticket is a trailer after the archive's last byte (package_trailer.h), where no archive reader looks;
-// the cdhash is the digest that the archive's own signature signs. Trailers of unknown types are kept: the
-// ones after the old ticket move before the new one, all others keep their place.
+// The ticket is a trailer after the archive's last byte (formats/package_trailers.h), where no archive reader
+// looks; the cdhash is the digest that the archive's own signature signs. Trailers of unknown types are kept:
+// the ones after the old ticket move before the new one, all others keep their place.
 #pragma once
 
+#include "formats/package_trailers.h"
 #include "foundation/bytes.h"
 #include "src/PWHashedFile/PWHashedFile.h"
-#include "src/PWHashedFile/package_trailer_walk.h"
 
 namespace pinwell {
 
@@ -23,9 +23,6 @@ class PWHashedFlatPackage : public PWHashedFile {
     std::uint64_t ticketStart() const noexcept { return trailers_.ticketStart; }
     std::uint64_t ticketLength() const noexcept { return trailers_.ticketLength; }
 
-    /// Why the walk found no ticket, with the offset in the file; `nullopt` if it met no damage.
-    const std::optional<ticket_fault>& fault() const noexcept { return trailers_.fault; }
-
     /// There is a terminator, or a trailer of unknown type.
     bool hasTrailers() const noexcept { return trailers_.hasTrailers; }
 
@@ -33,6 +30,8 @@ class PWHashedFlatPackage : public PWHashedFile {
     const std::optional<foundation::SharedBytes>& dataToAppend() const noexcept {
         return trailers_.dataToAppend;
     }
+
+    std::optional<TicketPlaceFault> ticketPlaceFault() override;
 
     /// Walks the trailers from the last one to the first ticket or the terminator.
     std::optional<Data> _ticketData() override;

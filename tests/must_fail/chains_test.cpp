@@ -2,9 +2,9 @@
 #include <gtest/gtest.h>
 
 #include "chain_faults.h"
+#include "formats/satchel.h"
 #include "result_table.h"
 #include "src/messages.h"
-#include "src/satchel_internal.h"
 #include "support/controller_run.h"
 #include "support/message_capture.h"
 

@@ -3,9 +3,9 @@
 #include <algorithm>
 
 #include "allocation_count.h"
+#include "formats/package_trailers.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
-#include "src/PWHashedFile/package_trailer.h"
 #include "support/disk_image_builder.h"
 #include "support/package_builder.h"
 #include "support/test_platform.h"

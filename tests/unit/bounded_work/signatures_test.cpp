@@ -6,9 +6,9 @@
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
 #include "codesign/superblob.h"
+#include "formats/superblob.h"
 #include "foundation/byte_reader.h"
 #include "foundation/byte_writer.h"
-#include "src/PWHashedFile/blob_set.h"
 #include "support/code_directory_builder.h"
 #include "support/executable_image_builder.h"
 

@@ -1,8 +1,8 @@
 #include <gtest/gtest.h>
 
 #include "allocation_count.h"
-#include "src/satchel_internal.h"
-#include "src/tm_ticket.h"
+#include "formats/satchel.h"
+#include "formats/tm_ticket.h"
 #include "support/fake_trust_service.h"
 #include "support/ticket_builder.h"
 #include "trust/certificate.h"

@@ -1,8 +1,8 @@
 // Damaged tickets and damaged places: the fault is reported, and the rest is shown.
+#include "formats/tm_ticket.h"
 #include "inspect/gather_ticket.h"
 #include "inspect_fixture.h"
 #include "src/DownloadDelegate.h"
-#include "src/tm_ticket.h"
 #include "support/disk_image_builder.h"
 #include "support/package_builder.h"
 

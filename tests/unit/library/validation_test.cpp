@@ -4,8 +4,8 @@
 
 #include <thread>
 
-#include "src/satchel.h"
-#include "src/tm_ticket.h"
+#include "formats/satchel.h"
+#include "formats/tm_ticket.h"
 #include "support/temporary_directory.h"
 #include "support/ticket_builder.h"
 #include "trust/trust.h"

@@ -6,11 +6,11 @@
 #include <limits>
 
 #include "disk_image_fixture.h"
+#include "formats/tm_ticket.h"
 #include "foundation/byte_writer.h"
 #include "foundation/bytes.h"
 #include "foundation/process.h"
 #include "foundation/value.h"
-#include "src/PWHashedFile/held_ticket.h"
 #include "src/cdhash_extract.h"
 #include "support/resident_memory.h"
 

@@ -6,9 +6,9 @@
 #include <algorithm>
 #include <filesystem>
 
+#include "formats/tm_ticket.h"
 #include "foundation/sanitized.h"
 #include "package_fixture.h"
-#include "src/PWHashedFile/held_ticket.h"
 #include "support/archive_builder.h"
 #include "support/resident_memory.h"
 

@@ -3,10 +3,10 @@
 
 #include <filesystem>
 
+#include "formats/package_trailers.h"
+#include "formats/tm_ticket.h"
 #include "foundation/url.h"
 #include "package_fixture.h"
-#include "src/PWHashedFile/held_ticket.h"
-#include "src/PWHashedFile/package_trailer_walk.h"
 #include "support/archive_builder.h"
 
 namespace pinwell {

@@ -1,4 +1,4 @@
-#include "src/PWHashedFile/synthetic_cdhash.h"
+#include "src/PWHashedFile/PWHashedDiskImage.h"
 
 #include <gtest/gtest.h>
 

@@ -1,0 +1,25 @@
+#include "formats/code_hashes.h"
+
+#include <set>
+
+#include "formats/tm_ticket.h"
+
+namespace pinwell {
+
+bool canListWith(const CodeHash& own, const CodeHash& hash) {
+    const std::size_t length = tm_cdhash_algorithm_get_size(hash.algorithm);
+    return length != 0 && hash.hash.size() == length && (hash.algorithm == 0) == (own.algorithm == 0);
+}
+
+std::vector<CodeHash> listableHashes(const CodeHash& own, const std::vector<CodeHash>& found) {
+    std::vector<CodeHash> hashes{own};
+    std::set<CodeHash> listed{own};
+    for (const CodeHash& hash : found) {
+        // If a digest type is unknown to tickets (from a later platform), the artefact's other hashes stay
+        // usable. If the own hash has an unknown digest type, the ticket lists only such hashes.
+        if (canListWith(own, hash) && listed.insert(hash).second) hashes.push_back(hash);
+    }
+    return hashes;
+}
+
+}  // namespace pinwell
