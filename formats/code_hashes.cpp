@@ -3,8 +3,15 @@
 #include <set>
 
 #include "formats/tm_ticket.h"
+#include "foundation/format.h"
 
 namespace pinwell {
+namespace {
+
+constexpr int kRecordNameVersionPlain = 1;
+constexpr int kRecordNameVersionWithAlgorithm = 2;
+
+}  // namespace
 
 bool canListWith(const CodeHash& own, const CodeHash& hash) {
     const std::size_t length = tm_cdhash_algorithm_get_size(hash.algorithm);
@@ -20,6 +27,12 @@ std::vector<CodeHash> listableHashes(const CodeHash& own, const std::vector<Code
         if (canListWith(own, hash) && listed.insert(hash).second) hashes.push_back(hash);
     }
     return hashes;
+}
+
+std::string recordNameForHash(std::uint32_t algorithm, foundation::ByteView hash) {
+    const std::string hex = foundation::toHex(hash);
+    if (algorithm == 0) return foundation::format("%d/%@", kRecordNameVersionPlain, hex);
+    return foundation::format("%d/%d/%@", kRecordNameVersionWithAlgorithm, algorithm, hex);
 }
 
 }  // namespace pinwell

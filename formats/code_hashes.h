@@ -1,8 +1,9 @@
-// The code hashes that a ticket for an artefact lists.
+// The code hashes that a ticket for an artefact lists, and the name of its record, which is made from one.
 #pragma once
 
 #include <compare>
 #include <cstdint>
+#include <string>
 #include <vector>
 
 #include "foundation/bytes.h"
@@ -24,5 +25,9 @@ bool canListWith(const CodeHash& own, const CodeHash& hash);
 /// Joins an artefact's own hash with the other hashes found in it: its own first, without duplicates. Leaves
 /// out hashes that a ticket with this own hash cannot list.
 std::vector<CodeHash> listableHashes(const CodeHash& own, const std::vector<CodeHash>& found);
+
+/// The name of the record that holds the ticket for a code hash: "2/ALGORITHM/HEX", or "1/HEX" if the
+/// algorithm is 0.
+std::string recordNameForHash(std::uint32_t algorithm, foundation::ByteView hash);
 
 }  // namespace pinwell

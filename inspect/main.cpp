@@ -21,8 +21,8 @@
 #include "sandbox/runaway.h"
 #include "sandbox/sandbox.h"
 #include "src/confinement.h"
-#include "src/host_platform.h"
 #include "src/messages.h"
+#include "src/platform.h"
 
 namespace {
 

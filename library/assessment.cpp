@@ -6,11 +6,11 @@
 #include <memory>
 #include <utility>
 
+#include "formats/code_hashes.h"
 #include "formats/explain_ticket.h"
 #include "library/c_calls.h"
 #include "library/local_platform.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
-#include "src/record_name.h"
 #include "verify/check.h"
 #include "verify/judged_ticket.h"
 #include "verify/verify.h"

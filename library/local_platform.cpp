@@ -4,7 +4,7 @@
 #include <utility>
 
 #include "library/roots.h"
-#include "src/type_naming.h"
+#include "src/PWHashedFile/file_kind.h"
 #include "trust/trust_service.h"
 
 namespace pinwell::library {

@@ -9,8 +9,8 @@
 #include "lumora-local/failure.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/cdhash_extract.h"
-#include "src/host_platform.h"
 #include "src/messages.h"
+#include "src/platform.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "codesign/code_directory.h"
+#include "formats/code_hashes.h"
 #include "formats/explain_ticket.h"
 #include "foundation/base64.h"
 #include "foundation/format.h"
@@ -13,7 +14,6 @@
 #include "foundation/value.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/messages.h"
-#include "src/record_name.h"
 
 namespace pinwell::retrieval {
 namespace {

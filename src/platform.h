@@ -1,7 +1,8 @@
-// The host platform for the tool: one reference to each service, made once in main and passed down.
+// The host platform for the tool: the services, made once in main and passed down.
 #pragma once
 
 #include <functional>
+#include <memory>
 
 #include "codesign/code_signing.h"
 #include "defaults/user_defaults.h"
@@ -14,7 +15,7 @@
 
 namespace pinwell {
 
-/// Copies share the services, which must outlive them all.
+/// One reference to each service. Copies share the services, which must outlive them all.
 struct Platform {
     files::FileManager& files;
     types::TypeService& types;
@@ -27,6 +28,36 @@ struct Platform {
 
     /// Ends the process with a status; does not return. A test may throw from it instead.
     std::function<void(int)> exitProcess;
+};
+
+/// The services of this machine, made and connected, for main and the companions.
+///
+/// Owns every service; must outlive every user of its services(). The constructor reads only the
+/// environment.
+class HostPlatform {
+  public:
+    /// Whether a session keeps its connection for the next exchange, or makes a new one for each.
+    enum class Connections : bool { closed, kept };
+
+    /// `exitProcess` ends the process with a status.
+    explicit HostPlatform(std::function<void(int)> exitProcess,
+                          Connections connections = Connections::closed);
+    HostPlatform(const HostPlatform&) = delete;
+    HostPlatform& operator=(const HostPlatform&) = delete;
+
+    Platform services() const;
+
+  private:
+    // In the order of their dependencies.
+    const foundation::PlatformDirectory directory_;
+    const std::unique_ptr<syslog::SystemLog> systemLog_;
+    const std::unique_ptr<types::TypeService> types_;
+    const std::unique_ptr<files::FileManager> files_;
+    const std::unique_ptr<codesign::CodeSigningService> codeSigning_;
+    const std::unique_ptr<trust::TrustService> trust_;
+    const std::unique_ptr<https::SessionService> https_;
+    const std::unique_ptr<defaults::UserDefaultsService> userDefaults_;
+    const std::function<void(int)> exitProcess_;
 };
 
 }  // namespace pinwell

@@ -16,12 +16,12 @@
 #include <string_view>
 #include <vector>
 
+#include "formats/code_hashes.h"
 #include "foundation/bytes.h"
 #include "foundation/url.h"
 #include "foundation/value.h"
 #include "https/session.h"
 #include "src/platform.h"
-#include "src/record_name.h"
 
 namespace pinwell {
 

@@ -19,8 +19,8 @@
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"
-#include "src/host_platform.h"
 #include "src/messages.h"
+#include "src/platform.h"
 #include "ticket/commands.h"
 
 namespace {

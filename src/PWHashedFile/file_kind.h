@@ -1,4 +1,5 @@
-// Which kind of hashed file handles a path: decided from its uniform type identifier and extension.
+// The type of an item, and which kind of hashed file handles it: decided from its uniform type identifier and
+// extension.
 #pragma once
 
 #include <cstdint>
@@ -7,9 +8,14 @@
 #include <string>
 #include <string_view>
 
+#include "files/file_manager.h"
 #include "types/type_service.h"
 
 namespace pinwell {
+
+/// The type of an item, from the file manager's facts about it. main passes it to the file manager: neither
+/// that service nor the type service knows the other.
+files::ItemType nameType(types::TypeService& types, const files::ItemFacts& facts);
 
 /// The outcome of assessmentClassForUTI.
 enum class AssessmentClass : std::int32_t {

@@ -1,7 +1,7 @@
 #include "support/test_platform.h"
 
 #include "foundation/byte_writer.h"
-#include "src/type_naming.h"
+#include "src/PWHashedFile/file_kind.h"
 
 namespace pinwell::test {
 

@@ -12,7 +12,7 @@
 #include "foundation/format.h"
 #include "foundation/url.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
-#include "src/host_platform.h"
+#include "src/platform.h"
 #include "stapling.h"
 #include "support/environment.h"
 #include "support/executable_image_builder.h"

@@ -1,7 +1,7 @@
-#include "src/host_platform.h"
+#include "src/platform.h"
 
 #include "https/session_options.h"
-#include "src/type_naming.h"
+#include "src/PWHashedFile/file_kind.h"
 
 namespace pinwell {
 
