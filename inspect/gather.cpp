@@ -85,7 +85,8 @@ void concludeWithoutTicket(const std::optional<TicketPlaceFault>& fault, Report&
     } else if (fault->isAbsence) {
         report.conclusion = "No ticket is stapled to this file: " + fault->rule + ".";
     } else {
-        report.outcome = Outcome::refused;
+        const auto* const image = std::get_if<SuperblobPlace>(&report.place);
+        report.outcome = image != nullptr && !image->isReadable ? Outcome::unreadable : Outcome::refused;
         report.conclusion = "No ticket can be read: " + fault->rule + ".";
     }
 }
@@ -138,7 +139,9 @@ std::optional<TicketPlaceFault> Inspector::gatherBundle(const URL& url, Report& 
 std::optional<TicketPlaceFault> Inspector::gatherImage(const URL& url, Report& report) const {
     report.code = codesign::describeCode(url.path());
     PWHashedDiskImage image(url, platform_);
-    if (image.appropriateExitCode() == kExitOK) {
+    SuperblobPlace place;
+    place.isReadable = image.appropriateExitCode() == kExitOK;
+    if (place.isReadable) {
         setHash(image, report);
         const codesign::SliceDescription* const code = report.code->preferredSlice();
         const bool isSigned = code != nullptr && code->signature && !code->signature->directories.empty();
@@ -146,7 +149,6 @@ std::optional<TicketPlaceFault> Inspector::gatherImage(const URL& url, Report& r
     }
 
     const auto fault = image.ticketPlaceFault();
-    SuperblobPlace place;
     place.trailerOffset = image.origEOF() < kUDIFHeaderSize ? 0 : image.origEOF() - kUDIFHeaderSize;
     place.fault = faultOf(fault);
     const bool isSet = image.dmgHeader().codeSignOffset() != 0 && image.dmgHeader().codeSignLength() != 0;

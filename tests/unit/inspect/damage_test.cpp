@@ -137,7 +137,7 @@ TEST_F(DamagedPlace, ASuperblobWithAWrongLengthStillShowsItsTableAndTheTicket) {
     std::string contents = image.stapledWith(ticketFor(image));
     contents[100'000 + 7] = static_cast<char>(contents[100'000 + 7] ^ 1);
     const Report report = inspect(write(image.name, contents));
-    EXPECT_EQ(report.outcome, Outcome::refused);
+    EXPECT_EQ(report.outcome, Outcome::unreadable);
     EXPECT_EQ(report.fault->rule, "the superblob's length is not the one in the trailer");
     EXPECT_EQ(report.fault->fileOffset, 100'004U);
     EXPECT_THAT(std::get<SuperblobPlace>(report.place).blobs, SizeIs(4));
@@ -150,8 +150,21 @@ TEST_F(DamagedPlace, ABlobThatReachesTooFarIsMarked) {
     contents[100'000 + 20 + 4] = 1;  // the blob's length
     const Report report = inspect(write(image.name, contents));
     EXPECT_EQ(std::get<SuperblobPlace>(report.place).blobs.at(0).problem, "reaches past the superblob");
-    EXPECT_EQ(report.outcome, Outcome::refused);
+    EXPECT_EQ(report.outcome, Outcome::unreadable);
     EXPECT_EQ(report.ticket->signature, inspect::Signature::verifies);
+}
+
+TEST_F(DamagedPlace, AnImageHasTheExitStatusOfTheTool) {
+    const Artefact image = signedImage();
+    const std::string whole = image.stapledWith(ticketFor(image));
+    for (const std::size_t at : {whole.size() - 512, whole.size() - 512 + 303, std::size_t{100'000}}) {
+        std::string contents = whole;
+        contents[at] = static_cast<char>(contents[at] ^ 1);
+        const std::string path = write(image.name, contents);
+        const auto tool = PWHashedFile::initWithFileURL(foundation::URL::fileURLWithPath(path), services());
+        EXPECT_EQ(tool->appropriateExitCode(), 66) << at;
+        EXPECT_EQ(inspect::exitStatusOf(inspect(path).outcome), 66) << at;
+    }
 }
 
 TEST_F(DamagedPlace, AnImageWithoutItsTrailerIsUnreadable) {
