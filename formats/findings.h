@@ -7,6 +7,7 @@
 #include <cstdint>
 #include <functional>
 #include <string>
+#include <string_view>
 #include <type_traits>
 #include <utility>
 
@@ -26,7 +27,9 @@ struct ticket_fault {
     /// allocate.
     const char* rule = "";
 
-    bool operator==(const ticket_fault&) const = default;
+    friend bool operator==(const ticket_fault& a, const ticket_fault& b) {
+        return a.offset == b.offset && std::string_view(a.rule) == b.rule;
+    }
 };
 
 /// Passes a parser's diagnostic lines to a listener, each without a newline, in the order of the parser's

@@ -2,8 +2,12 @@
 
 #include <gtest/gtest.h>
 
+#include <vector>
+
+#include "formats/explain_ticket.h"
 #include "foundation/bytes.h"
 #include "support/collected_diagnostics.h"
+#include "support/memory_reader.h"
 #include "support/package_builder.h"
 
 namespace pinwell {
@@ -156,6 +160,128 @@ TEST(PackageTrailer, ATicketOf4294967295BytesCanBeWrittenAndOneByteMoreCannot) {
     EXPECT_FALSE(isWritableTicketLength(kFourGiB));
     EXPECT_TRUE(isWritableTicketLength(1));
     EXPECT_FALSE(isWritableTicketLength(0));
+}
+
+using test::PackageBuilder;
+
+struct Surveyed {
+    package_trailer_survey survey;
+    std::vector<surveyed_trailer> trailers;
+};
+
+Surveyed surveyOf(const std::string& package) {
+    test::MemoryReader file(foundation::toData(foundation::asBytes(package)));
+    Surveyed found;
+    found.survey = surveyPackageTrailers(
+        file, [&](const surveyed_trailer& trailer) { found.trailers.push_back(trailer); });
+    return found;
+}
+
+package_trailers walkOf(const std::string& package) {
+    test::MemoryReader file(foundation::toData(foundation::asBytes(package)));
+    return walkPackageTrailers(file, "Sample.pkg");
+}
+
+TrailerFields ticketOfVersion2() {
+    TrailerFields fields;
+    fields.type = 2;
+    fields.version = 2;
+    return fields;
+}
+
+TEST(PackageTrailerSurvey, PassesTheTicketUpToTheTerminator) {
+    const PackageBuilder package =
+        PackageBuilder().terminator().unknown("abc").ticket("the ticket").unknown("de");
+    const auto [survey, trailers] = surveyOf(package.build());
+    ASSERT_EQ(trailers.size(), 4U);
+    EXPECT_TRUE(survey.hasTerminator);
+    EXPECT_EQ(survey.fault, std::nullopt);
+    EXPECT_EQ(survey.ticketStart, package.archiveSize() + 16 + 3 + 16);
+    EXPECT_EQ(survey.ticketLength, 10U);
+    EXPECT_EQ(trailers[1].dataOffset, survey.ticketStart);
+    EXPECT_EQ(trailers[1].recordOffset, *survey.ticketStart + 10);
+    EXPECT_TRUE(trailers[3].isTerminator);
+    EXPECT_EQ(trailers[3].recordOffset, package.archiveSize());
+}
+
+TEST(PackageTrailerSurvey, OfAnArchiveAloneFindsNothing) {
+    const auto [survey, trailers] = surveyOf(PackageBuilder().build());
+    EXPECT_TRUE(trailers.empty());
+    EXPECT_FALSE(survey.hasTerminator);
+    EXPECT_EQ(survey.ticketStart, std::nullopt);
+    EXPECT_EQ(surveyOf("short").trailers.size(), 0U);
+}
+
+TEST(PackageTrailerSurvey, OfTwoTicketsCountsTheLastInTheFile) {
+    const auto [survey, trailers] =
+        surveyOf(PackageBuilder().terminator().ticket("earlier").ticket("later").build());
+    EXPECT_EQ(trailers.size(), 3U);
+    EXPECT_EQ(survey.ticketLength, 5U);
+}
+
+TEST(PackageTrailerSurvey, PassesADamagedRecordAndStatesTheFaultOfTheWalk) {
+    const PackageBuilder package = PackageBuilder().terminator().ticket("good").trailer(ticketOfVersion2());
+    const auto [survey, trailers] = surveyOf(package.build());
+    ASSERT_EQ(trailers.size(), 3U);
+    ASSERT_TRUE(survey.fault.has_value());
+    EXPECT_STREQ(survey.fault->rule, "a trailer's version is not 1");
+    EXPECT_EQ(survey.fault, walkOf(package.build()).fault);
+    EXPECT_EQ(trailers[0].fault, survey.fault);
+}
+
+TEST(PackageTrailerSurvey, IgnoresAFaultBeforeTheTicketLikeTheWalk) {
+    const std::string package =
+        PackageBuilder().terminator().trailer(ticketOfVersion2()).ticket("good").build();
+    const auto [survey, trailers] = surveyOf(package);
+    EXPECT_EQ(survey.fault, std::nullopt);
+    EXPECT_EQ(walkOf(package).fault, std::nullopt);
+    EXPECT_NE(trailers.at(1).fault, std::nullopt);
+}
+
+TEST(PackageTrailerSurvey, EndsAtARecordWhoseDataWouldBeginBeforeTheFile) {
+    TrailerFields fields;
+    fields.length = 0xFFFFFFFF;
+    const std::string package = PackageBuilder().terminator().trailer(fields).build();
+    const auto [survey, trailers] = surveyOf(package);
+    ASSERT_EQ(trailers.size(), 1U);
+    EXPECT_EQ(trailers[0].dataOffset, std::nullopt);
+    EXPECT_STREQ(survey.fault.value_or(ticket_fault()).rule, "a trailer's data would begin before the file");
+    EXPECT_EQ(survey.fault, walkOf(package).fault);
+}
+
+TEST(PackageTrailerSurvey, ThrowsIfARecordCannotBeRead) {
+    const std::string package = PackageBuilder().terminator().ticket("ticket").build();
+    test::MemoryReader file(foundation::toData(foundation::asBytes(package)), package.size() - 1);
+    EXPECT_THROW(surveyPackageTrailers(file, [](const surveyed_trailer&) {}), files::FileHandleError);
+}
+
+TEST(PackageTrailerWalk, TurnsAReadErrorIntoAFaultAndADiagnosticLine) {
+    const std::string package = PackageBuilder().terminator().ticket("ticket").build();
+    test::MemoryReader file(foundation::toData(foundation::asBytes(package)), package.size() - 1);
+    CollectedDiagnostics said;
+    const package_trailers walked = walkPackageTrailers(file, "Sample.pkg", {}, said.diagnostics());
+    EXPECT_EQ(walked.ticket, std::nullopt);
+    EXPECT_EQ(walked.fault, (ticket_fault{package.size(), "the trailers cannot be read"}));
+    EXPECT_EQ(said.text(), "Couldn't read existing package trailers of Sample.pkg. a broken sector.\n");
+}
+
+TEST(PackageTrailerWalk, StatesEachStepInOrder) {
+    test::MemoryReader file(
+        foundation::toData(foundation::asBytes(PackageBuilder().terminator().ticket("ticket").build())));
+    CollectedDiagnostics said;
+    const package_trailers walked = walkPackageTrailers(file, "Sample.pkg", {}, said.diagnostics());
+    EXPECT_EQ(said.lines(),
+              (std::vector<std::string>{
+                  "Terminator Trailer size must be 0, not 6", "{magic: t8lr, version: 1, type: 2, length: 6}",
+                  foundation::format("Found expected ticket at %llu with length of 6", walked.ticketStart)}));
+}
+
+TEST(TicketPlace, OfAPackageIsAtFaultIfTheWalkEndedWithAFault) {
+    EXPECT_EQ(explainTicketPlace(walkOf(PackageBuilder().terminator().ticket("ticket").build())),
+              std::nullopt);
+    const std::string damaged = PackageBuilder().trailer(ticketOfVersion2()).build();
+    EXPECT_EQ(explainTicketPlace(walkOf(damaged)),
+              (TicketPlaceFault{"a trailer's version is not 1", damaged.size() - 16}));
 }
 
 }  // namespace
