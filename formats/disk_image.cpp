@@ -16,9 +16,16 @@ using foundation::ByteView;
 
 constexpr std::size_t kUDIFVersionOffset = 4;
 constexpr std::size_t kUDIFHeaderSizeOffset = 8;
+constexpr std::size_t kDataForkOffset = 24;
+constexpr std::size_t kDataForkLengthOffset = 32;
+constexpr std::size_t kDataForkChecksumOffset = 80;
+constexpr std::size_t kXMLOffset = 216;
+constexpr std::size_t kXMLLengthOffset = 224;
 constexpr std::size_t kCodeSignLengthOffset = 304;
+constexpr std::size_t kMasterChecksumOffset = 352;
+constexpr std::size_t kChecksumSize = 136;
 
-ByteReader trailerFieldAt(foundation::ByteView header, std::size_t offset) {
+ByteReader trailerFieldAt(ByteView header, std::size_t offset) {
     ByteReader reader(header);
     reader.seek(offset, "UDIF header field");
     return reader;
@@ -39,7 +46,7 @@ void attempt(Step&& step, Report&& report) {
 
 }  // namespace
 
-bool UDIFFileHeader::assign(foundation::ByteView bytes) {
+bool UDIFFileHeader::assign(ByteView bytes) {
     if (bytes.size() != bytes_.size()) return false;
     std::copy(bytes.begin(), bytes.end(), bytes_.begin());
     return true;
@@ -59,6 +66,30 @@ std::uint32_t UDIFFileHeader::version() const {
 
 std::uint32_t UDIFFileHeader::headerSize() const {
     return trailerFieldAt(bytes_, kUDIFHeaderSizeOffset).be32("fUDIFHeaderSize");
+}
+
+std::uint64_t UDIFFileHeader::dataForkOffset() const {
+    return trailerFieldAt(bytes_, kDataForkOffset).be64("fUDIFDataForkOffset");
+}
+
+std::uint64_t UDIFFileHeader::dataForkLength() const {
+    return trailerFieldAt(bytes_, kDataForkLengthOffset).be64("fUDIFDataForkLength");
+}
+
+std::uint64_t UDIFFileHeader::xmlOffset() const {
+    return trailerFieldAt(bytes_, kXMLOffset).be64("fUDIFXMLOffset");
+}
+
+std::uint64_t UDIFFileHeader::xmlLength() const {
+    return trailerFieldAt(bytes_, kXMLLengthOffset).be64("fUDIFXMLLength");
+}
+
+ByteView UDIFFileHeader::dataForkChecksum() const {
+    return bytes().subspan(kDataForkChecksumOffset, kChecksumSize);
+}
+
+ByteView UDIFFileHeader::masterChecksum() const {
+    return bytes().subspan(kMasterChecksumOffset, kChecksumSize);
 }
 
 std::uint64_t UDIFFileHeader::codeSignOffset() const {

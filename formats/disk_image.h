@@ -30,7 +30,7 @@
 // | 492    | 8    | fUDIFSectorCount, unaligned                                                    |
 // | 500    | 12   | fPadding                                                                       |
 //
-// Only the first three and the two code-signature fields are read; all others are kept as stored.
+// All fields are kept as stored. The tool reads only the first three and the two code-signature fields.
 #pragma once
 
 #include <array>
@@ -65,10 +65,18 @@ class UDIFFileHeader {
 
     std::uint32_t version() const;
     std::uint32_t headerSize() const;  // as stored
+    std::uint64_t dataForkOffset() const;
+    std::uint64_t dataForkLength() const;
+    std::uint64_t xmlOffset() const;
+    std::uint64_t xmlLength() const;
     std::uint64_t codeSignOffset() const;
     std::uint64_t codeSignLength() const;
 
-    /// Changes only these two fields.
+    /// The checksums: type (4), length (4), data (128). Views of this object.
+    foundation::ByteView dataForkChecksum() const;
+    foundation::ByteView masterChecksum() const;
+
+    /// Changes only the two code-signature fields.
     void setCodeSign(std::uint64_t offset, std::uint64_t length);
 
     foundation::ByteView bytes() const noexcept { return bytes_; }

@@ -221,15 +221,11 @@ class SecondOpinion {
     SecondOpinion(const ByteSource& source, const codesign::DiskImageTrailer& trailer, Workers& workers,
                   Section& section)
         : source_(source),
-          bytes_(trailer.canonicalBytes()),
+          trailer_(trailer.header()),
           limit_(trailer.signedLimit()),
           workers_(workers),
-          section_(section) {
-        ByteReader reader(bytes_);
-        reader.seek(24, "data fork");
-        dataFork_.offset = reader.be64("data fork offset");
-        dataFork_.length = reader.be64("data fork length");
-    }
+          section_(section),
+          dataFork_{trailer_.dataForkOffset(), trailer_.dataForkLength()} {}
 
     void run() {
         const std::optional<Data> document = propertyList();
@@ -259,10 +255,8 @@ class SecondOpinion {
 
   private:
     std::optional<Data> propertyList() const {
-        ByteReader reader(bytes_);
-        reader.seek(216, "property list");
-        const std::uint64_t offset = reader.be64("property list offset");
-        const std::uint64_t length = reader.be64("property list length");
+        const std::uint64_t offset = trailer_.xmlOffset();
+        const std::uint64_t length = trailer_.xmlLength();
         if (length == 0 || length > foundation::kMaximumPropertyListSize || offset > limit_ ||
             length > limit_ - offset)
             return std::nullopt;
@@ -292,14 +286,12 @@ class SecondOpinion {
         }
         Checksum all;
         all.append(values.data());
-        ByteReader reader(bytes_);
-        reader.seek(352, "master checksum");
+        ByteReader reader(trailer_.masterChecksum());
         compare("master checksum", statedChecksum(reader), all.value);
     }
 
     void checkDataFork() {
-        ByteReader reader(bytes_);
-        reader.seek(80, "data checksum");
+        ByteReader reader(trailer_.dataForkChecksum());
         const std::optional<std::uint32_t> stated = statedChecksum(reader);
         if (dataFork_.offset > limit_ || dataFork_.length > limit_ - dataFork_.offset)
             return fail("data fork", "data before the signature", "data that reach further");
@@ -322,11 +314,11 @@ class SecondOpinion {
     void skip(std::string why) { section_.skip(kBlockTable, "disk image", std::move(why)); }
 
     const ByteSource& source_;
-    const Data bytes_;  // of the trailer
+    const UDIFFileHeader& trailer_;
     const std::uint64_t limit_;
     Workers& workers_;
     Section& section_;
-    FileRange dataFork_;
+    const FileRange dataFork_;
 };
 
 }  // namespace

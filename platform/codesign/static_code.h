@@ -35,6 +35,9 @@ class DiskImageTrailer {
     /// cannot be read.
     static std::optional<DiskImageTrailer> read(const ByteSource& source);
 
+    /// The fields, as stored.
+    const UDIFFileHeader& header() const noexcept { return header_; }
+
     /// The offset of the trailer itself.
     std::uint64_t offset() const noexcept { return offset_; }
 
