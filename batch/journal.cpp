@@ -1,7 +1,6 @@
 #include "batch/journal.h"
 
 #include <fcntl.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -10,6 +9,7 @@
 #include <utility>
 
 #include "batch/report.h"
+#include "foundation/file_io.h"
 #include "foundation/format.h"
 #include "src/DownloadDelegate.h"
 
@@ -66,15 +66,12 @@ std::optional<std::array<std::string_view, kFields>> fieldsOf(std::string_view l
 
 Result<Journal> Journal::open(const std::string& path) {
     constexpr mode_t kMode = 0666;  // without the bits of the user's mask
-    foundation::FileDescriptor file(
-        ::open(path.c_str(), O_RDWR | O_APPEND | O_CREAT | O_CLOEXEC | O_NOCTTY | O_NONBLOCK, kMode));
-    if (!file) return Error::posix(errno, path);
-    struct stat status {};
-    if (::fstat(file.get(), &status) != 0) return Error::posix(errno, path);
-    if (!S_ISREG(status.st_mode))
+    auto file = foundation::openRegularFile(path, O_RDWR | O_APPEND | O_CREAT, kMode);
+    if (!file && file.error().code() == EINVAL)
         return Error(foundation::kDataErrorDomain, foundation::kMalformedDocument,
                      path + " is not a regular file.");
-    Journal journal(path, std::move(file));
+    if (!file) return file.error();
+    Journal journal(path, std::move(file->descriptor));
     if (const auto done = journal.read(); !done) return done.error();
     return journal;
 }

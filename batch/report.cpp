@@ -14,6 +14,7 @@
 #include <nlohmann/json.hpp>
 #include <utility>
 
+#include "foundation/file_io.h"
 #include "foundation/format.h"
 #include "foundation/markup.h"
 #include "src/DownloadDelegate.h"
@@ -101,9 +102,10 @@ Error refusal(std::string text) {
 
 bool beginsAsXml(const std::string& path) {
     constexpr std::string_view kBeginning = "<?xml";
-    const foundation::FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY));
+    const auto file = foundation::openRegularFile(path, O_RDONLY);
     std::array<char, kBeginning.size()> bytes{};
-    return file && ::read(file.get(), bytes.data(), bytes.size()) == static_cast<ssize_t>(bytes.size()) &&
+    return file &&
+           ::read(file->descriptor.get(), bytes.data(), bytes.size()) == static_cast<ssize_t>(bytes.size()) &&
            std::string_view(bytes.data(), bytes.size()) == kBeginning;
 }
 

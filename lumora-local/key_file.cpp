@@ -1,8 +1,8 @@
 #include "lumora-local/key_file.h"
 
+#include <fcntl.h>
 #include <openssl/crypto.h>
 #include <openssl/pkcs12.h>
-#include <sys/stat.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -11,8 +11,10 @@
 #include <cstring>
 #include <exception>
 #include <span>
+#include <utility>
 
 #include "foundation/error.h"
+#include "foundation/file_io.h"
 #include "foundation/format.h"
 #include "foundation/secret_file.h"
 #include "lumora-local/failure.h"
@@ -37,15 +39,12 @@ Passphrase::~Passphrase() {
 
 void Passphrase::read(const std::string& place) {
     const std::string path = pathOfPassphrase(place);
-    const auto file = secretOf(foundation::openSecret(path));
-    struct stat status {};
-    if (::fstat(file.get(), &status) != 0)
-        throw Failure(EX_NOINPUT, foundation::Error::posix(errno, path).localizedDescription());
-    if (!S_ISREG(status.st_mode)) {
+    auto opened = foundation::openRegularFile(path, O_RDONLY);
+    if (!opened && (opened.error().code() == EISDIR || opened.error().code() == EINVAL))
         throw Failure(EX_CONFIG, foundation::format("the passphrase file %@ is no regular file", path));
-    }
+    const auto file = secretOf(std::move(opened));
     const std::size_t length =
-        secretOf(foundation::readSecret(file, path, std::as_writable_bytes(std::span(text_))));
+        secretOf(foundation::readSecret(file.descriptor, path, std::as_writable_bytes(std::span(text_))));
     const auto* const end =
         std::find(text_.begin(), text_.begin() + static_cast<std::ptrdiff_t>(length), '\n');
     length_ = static_cast<std::size_t>(end - text_.begin());

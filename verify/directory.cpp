@@ -32,14 +32,8 @@ bool isName(std::string_view name) {
            name.find('\0') == std::string_view::npos;
 }
 
-FileDescriptor openBelow(int directory, const std::string& name, int flags) {
+void requireName(const std::string& name) {
     if (!isName(name)) throw CodeError(codesign::kStaticCodeNotFound, "no name of a file");
-    for (;;) {
-        FileDescriptor opened(openat(directory, name.c_str(),
-                                     flags | O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
-        if (opened) return opened;
-        if (errno != EINTR) fail(errno, name);
-    }
 }
 
 EntryKind kindFrom(mode_t mode) {
@@ -86,13 +80,10 @@ bool staysBelow(const std::vector<std::string>& pending) {
 
 }  // namespace
 
-OpenFile::OpenFile(FileDescriptor file) : file_(std::move(file)) {
-    struct stat status = {};
-    if (fstat(file_.get(), &status) != 0) fail(errno, "the file");
-    if (!S_ISREG(status.st_mode)) throw CodeError(codesign::kStaticCodeNotFound, "not a regular file");
-    size_ = static_cast<std::uint64_t>(status.st_size);
-    hasExecuteBit_ = (status.st_mode & (S_IXUSR | S_IXGRP | S_IXOTH)) != 0;
-}
+OpenFile::OpenFile(foundation::RegularFile file)
+    : file_(std::move(file.descriptor)),
+      size_(static_cast<std::uint64_t>(file.status.st_size)),
+      hasExecuteBit_((file.status.st_mode & (S_IXUSR | S_IXGRP | S_IXOTH)) != 0) {}
 
 void OpenFile::expectSequentialReads() const {
     posix_fadvise(file_.get(), 0, 0, POSIX_FADV_SEQUENTIAL);
@@ -155,15 +146,27 @@ std::optional<EntryKind> OpenDirectory::kindOf(const std::string& name) const {
 }
 
 DirectoryRef OpenDirectory::directory(const std::string& name) const {
-    return DirectoryRef(new OpenDirectory(openBelow(directory_.get(), name, O_DIRECTORY)));
+    requireName(name);
+    for (;;) {
+        FileDescriptor opened(
+            openat(directory_.get(), name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+        if (opened) return DirectoryRef(new OpenDirectory(std::move(opened)));
+        if (errno != EINTR) fail(errno, name);
+    }
 }
 
 std::unique_ptr<OpenFile> OpenDirectory::file(const std::string& name) const {
-    return std::make_unique<OpenFile>(openBelow(directory_.get(), name, 0));
+    requireName(name);
+    auto opened = foundation::openRegularFile(directory_.get(), name, O_RDONLY | O_NOFOLLOW, name);
+    if (opened) return std::make_unique<OpenFile>(*std::move(opened));
+    const auto reason = static_cast<int>(opened.error().code());
+    if (reason == EISDIR || reason == EINVAL)
+        throw CodeError(codesign::kStaticCodeNotFound, "not a regular file");
+    fail(reason, name);
 }
 
 std::string OpenDirectory::linkTarget(const std::string& name) const {
-    if (!isName(name)) throw CodeError(codesign::kStaticCodeNotFound, "no name of a file");
+    requireName(name);
     std::array<char, PATH_MAX> target{};
     const ssize_t length = readlinkat(directory_.get(), name.c_str(), target.data(), target.size());
     if (length < 0) fail(errno, name);

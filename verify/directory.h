@@ -26,8 +26,7 @@ struct Entry {
 /// The bytes of an open regular file, with the size it had when it was opened.
 class OpenFile final : public codesign::ByteSource {
   public:
-    /// Throws codesign::CodeError unless it is a regular file.
-    explicit OpenFile(foundation::FileDescriptor file);
+    explicit OpenFile(foundation::RegularFile file);
 
     std::uint64_t size() const override { return size_; }
 
@@ -40,8 +39,8 @@ class OpenFile final : public codesign::ByteSource {
     std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const override;
 
     foundation::FileDescriptor file_;
-    std::uint64_t size_ = 0;
-    bool hasExecuteBit_ = false;
+    std::uint64_t size_;
+    bool hasExecuteBit_;
 };
 
 /// Immutable; may be used from any number of threads. Every method throws codesign::CodeError: kIOError if

@@ -15,11 +15,8 @@ namespace {
 
 constexpr std::size_t kChunk = 16 * 1024;
 
-// 0 for a regular file, otherwise the errno value of the refusal.
-int refusal(const struct stat& status) {
-    if (S_ISREG(status.st_mode)) return 0;
-    return S_ISDIR(status.st_mode) ? EISDIR : EINVAL;
-}
+// Without O_NONBLOCK, a FIFO that replaces the file between the check and the open would block us forever.
+constexpr int kSafeFlags = O_CLOEXEC | O_NONBLOCK | O_NOCTTY;
 
 // Returns up to the wanted number of bytes, 0 at the end, -1 with errno.
 ssize_t readChunk(int file, std::span<std::byte> chunk) {
@@ -29,31 +26,7 @@ ssize_t readChunk(int file, std::span<std::byte> chunk) {
     return count;
 }
 
-}  // namespace
-
-void FileDescriptor::reset() noexcept {
-    if (number_ >= 0) ::close(number_);
-    number_ = -1;
-}
-
-Result<Data> readSmallFile(const std::string& path, std::size_t limit) {
-    if (path.find('\0') != std::string::npos) return Error::posix(EINVAL, path);
-    // Checked before opening, because opening alone can have an effect on a device. Checked again afterwards,
-    // because the name may lead elsewhere by then. O_NONBLOCK prevents blocking on a FIFO that appears in
-    // between.
-    struct stat status {};
-    if (::stat(path.c_str(), &status) != 0) return Error::posix(errno, path);
-    if (const int reason = refusal(status)) return Error::posix(reason, path);
-    const FileDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
-    if (!file) return Error::posix(errno, path);
-    return readSmallFile(file, path, limit);
-}
-
-Result<Data> readSmallFile(const FileDescriptor& file, const std::string& path, std::size_t limit) {
-    struct stat status {};
-    if (::fstat(file.get(), &status) != 0) return Error::posix(errno, path);
-    if (const int reason = refusal(status)) return Error::posix(reason, path);
-
+Result<Data> readToTheEnd(const FileDescriptor& file, const std::string& path, std::size_t limit) {
     Data contents;
     std::array<std::byte, kChunk> chunk;
     while (true) {
@@ -62,8 +35,57 @@ Result<Data> readSmallFile(const FileDescriptor& file, const std::string& path, 
         if (count == 0) return contents;
         const auto bytes = static_cast<std::size_t>(count);
         if (bytes > limit - contents.size()) return Error::posix(EFBIG, path);
-        append(contents, std::span(chunk).first(bytes));
+        foundation::append(contents, std::span(chunk).first(bytes));
     }
+}
+
+}  // namespace
+
+void FileDescriptor::reset() noexcept {
+    if (number_ >= 0) ::close(number_);
+    number_ = -1;
+}
+
+int notRegularReason(mode_t mode) noexcept {
+    if (S_ISREG(mode)) return 0;
+    if (S_ISDIR(mode)) return EISDIR;
+    return S_ISLNK(mode) ? ELOOP : EINVAL;
+}
+
+Result<RegularFile> openRegularFile(int directory, const std::string& name, int flags,
+                                    const std::string& path, mode_t mode) {
+    if (name.find('\0') != std::string::npos) return Error::posix(EINVAL, path);  // would name another file
+    RegularFile file;
+    const int ofLinks = (flags & O_NOFOLLOW) != 0 ? AT_SYMLINK_NOFOLLOW : 0;
+    const bool exists = ::fstatat(directory, name.c_str(), &file.status, ofLinks) == 0;
+    if (!exists && (errno != ENOENT || (flags & O_CREAT) == 0)) return Error::posix(errno, path);
+    if (exists)
+        if (const int reason = notRegularReason(file.status.st_mode)) return Error::posix(reason, path);
+
+    int number = -1;
+    do number = ::openat(directory, name.c_str(), flags | kSafeFlags, mode);
+    while (number < 0 && errno == EINTR);
+    file.descriptor = FileDescriptor(number);
+    if (!file.descriptor || ::fstat(number, &file.status) != 0) return Error::posix(errno, path);
+    if (const int reason = notRegularReason(file.status.st_mode)) return Error::posix(reason, path);
+    return file;
+}
+
+Result<RegularFile> openRegularFile(const std::string& path, int flags, mode_t mode) {
+    return openRegularFile(AT_FDCWD, path, flags, path, mode);
+}
+
+Result<Data> readSmallFile(const std::string& path, std::size_t limit) {
+    const auto file = openRegularFile(path, O_RDONLY);
+    if (!file) return file.error();
+    return readToTheEnd(file->descriptor, path, limit);
+}
+
+Result<Data> readSmallFile(const FileDescriptor& file, const std::string& path, std::size_t limit) {
+    struct stat status {};
+    if (::fstat(file.get(), &status) != 0) return Error::posix(errno, path);
+    if (const int reason = notRegularReason(status.st_mode)) return Error::posix(reason, path);
+    return readToTheEnd(file, path, limit);
 }
 
 std::string whyUnreadable(const Error& error) {

@@ -1,5 +1,7 @@
-// Small whole-file reads for configuration, certificates and property lists.
+// Opens regular files safely, and reads small ones whole: configuration, certificates, property lists.
 #pragma once
+
+#include <sys/stat.h>
 
 #include <string>
 #include <utility>
@@ -33,10 +35,31 @@ class FileDescriptor {
     int number_ = -1;
 };
 
+/// An open regular file, and its status when it was opened.
+struct RegularFile {
+    FileDescriptor descriptor;
+    struct stat status {};
+};
+
+/// The errno value for an item of this type instead of a regular file: EISDIR for a directory, ELOOP for a
+/// symbolic link, EINVAL for any other; 0 for a regular file.
+int notRegularReason(mode_t mode) noexcept;
+
+/// Opens the regular file `name` in `directory` (as openat(2) does), close-on-exec. Refuses anything else with
+/// notRegularReason(), and never blocks on it. Checks the type before opening, because opening alone can have
+/// an effect on a device. Checks it again afterwards, because the name may lead elsewhere by then.
+///
+/// `flags` and `mode` are those of open(2). O_NOFOLLOW refuses a symbolic link in the last component. With
+/// O_CREAT a missing file is made. The error is of kPOSIXErrorDomain and names `path`.
+Result<RegularFile> openRegularFile(int directory, const std::string& name, int flags,
+                                    const std::string& path, mode_t mode = 0);
+
+/// The same for a path of its own.
+Result<RegularFile> openRegularFile(const std::string& path, int flags, mode_t mode = 0);
+
 /// The whole of a regular file of at most `limit` bytes. Follows symbolic links; refuses anything but a
-/// regular file without blocking (EINVAL; EISDIR for a directory), and a longer file (EFBIG). Memory grows
-/// with the bytes really read, never with the file's claims. The error is of kPOSIXErrorDomain and names the
-/// path.
+/// regular file as above, and a longer file (EFBIG). Memory grows with the bytes really read, never with the
+/// file's claims. The error is of kPOSIXErrorDomain and names the path.
 Result<Data> readSmallFile(const std::string& path, std::size_t limit);
 
 /// The same for an open file, from its position on. Errors name it `path`.

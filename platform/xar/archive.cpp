@@ -1,7 +1,6 @@
 #include "xar/archive.h"
 
 #include <fcntl.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -57,15 +56,10 @@ std::unique_ptr<Archive> Archive::open(const std::string& path) {
 }
 
 bool Archive::openFile(const std::string& path) {
-    // Opening alone can start a device, so the first check comes before it. The second check is for an item
-    // that has replaced the file since; O_NONBLOCK prevents blocking on it.
-    struct stat status {};
-    if (uninterrupted([&] { return stat(path.c_str(), &status); }) != 0 || !S_ISREG(status.st_mode))
-        return false;
-    constexpr int kFlags = O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY;
-    file_ = foundation::FileDescriptor(uninterrupted([&] { return ::open(path.c_str(), kFlags); }));
-    if (!file_ || fstat(file_.get(), &status) != 0 || !S_ISREG(status.st_mode)) return false;
-    fileSize_ = static_cast<std::uint64_t>(status.st_size);
+    auto file = foundation::openRegularFile(path, O_RDONLY);
+    if (!file) return false;
+    file_ = std::move(file->descriptor);
+    fileSize_ = static_cast<std::uint64_t>(file->status.st_size);
     return true;
 }
 

@@ -101,6 +101,59 @@ TEST(SmallFile, IsNotNamedByTheTextBeforeAZeroByte) {
     EXPECT_EQ(failure((directory / "f") + std::string("\0g", 2)), EINVAL);
 }
 
+// The errno value with which opening fails, 0 if it succeeds.
+std::int64_t refusal(const std::string& path, int flags) {
+    const auto file = openRegularFile(path, flags, 0600);
+    return file ? 0 : file.error().code();
+}
+
+TEST(RegularFile, HasItsStatusAtOpening) {
+    const TemporaryDirectory directory;
+    test::writeFile(directory / "f", "four");
+    const auto file = openRegularFile(directory / "f", O_RDONLY);
+    ASSERT_TRUE(file);
+    EXPECT_EQ(file->status.st_size, 4);
+    EXPECT_NE(fcntl(file->descriptor.get(), F_GETFD) & FD_CLOEXEC, 0);
+}
+
+TEST(RegularFile, IsFoundThroughALinkUnlessTheCallerRefusesLinks) {
+    const TemporaryDirectory directory;
+    test::writeFile(directory / "f", "x");
+    std::filesystem::create_symlink("f", directory / "link");
+    std::filesystem::create_symlink("/dev/zero", directory / "device");
+    EXPECT_EQ(refusal(directory / "link", O_RDONLY), 0);
+    EXPECT_EQ(refusal(directory / "link", O_RDONLY | O_NOFOLLOW), ELOOP);
+    EXPECT_EQ(refusal(directory / "device", O_RDONLY), EINVAL);
+}
+
+TEST(RegularFile, IsNeitherDirectoryNorDeviceNorPipe) {
+    const TemporaryDirectory directory;
+    ASSERT_EQ(mkfifo((directory / "pipe").c_str(), 0600), 0);
+    for (const int access : {O_RDONLY, O_WRONLY, O_RDWR, O_RDWR | O_CREAT}) {
+        EXPECT_EQ(refusal(directory.path(), access), EISDIR);
+        EXPECT_EQ(refusal("/dev/null", access), EINVAL);
+        EXPECT_EQ(refusal(directory / "pipe", access), EINVAL);
+    }
+}
+
+TEST(RegularFile, IsMadeOnRequestOnly) {
+    const TemporaryDirectory directory;
+    EXPECT_EQ(refusal(directory / "f", O_WRONLY), ENOENT);
+    EXPECT_EQ(refusal(directory / "none/f", O_WRONLY | O_CREAT), ENOENT);
+    EXPECT_EQ(refusal(directory / "f", O_WRONLY | O_CREAT), 0);
+    EXPECT_EQ(refusal(directory / "f", O_WRONLY), 0);
+}
+
+TEST(RegularFile, IsOpenedInADirectoryAndNamedInErrorsAsTheCallerSays) {
+    const TemporaryDirectory directory;
+    test::writeFile(directory / "f", "x");
+    const FileDescriptor folder(open(directory.path().c_str(), O_PATH | O_CLOEXEC));
+    EXPECT_TRUE(openRegularFile(folder.get(), "f", O_RDONLY, "the file"));
+    const auto missing = openRegularFile(folder.get(), "g", O_RDONLY, "the file");
+    ASSERT_FALSE(missing);
+    EXPECT_EQ(missing.error().userInfo().at(std::string(kFilePathKey)), Value("the file"));
+}
+
 bool isOpen(int number) {
     return fcntl(number, F_GETFD) >= 0;
 }
