@@ -1,5 +1,4 @@
-#include "files/file_handle.h"
-
+// File handles.
 #include <fcntl.h>
 #include <sys/resource.h>
 #include <unistd.h>
@@ -9,7 +8,7 @@
 #include <limits>
 #include <utility>
 
-#include "files/posix.h"
+#include "files/operations.h"
 
 namespace pinwell::files {
 namespace {

@@ -108,13 +108,13 @@ class FileManager {
     virtual ~FileManager() = default;
 
     /// The six properties in one request.
-    virtual Result<ResourceProperties> resourceProperties(const URL& item) = 0;
+    virtual Result<ResourceProperties> resourceProperties(const URL& item) const = 0;
 
     /// The item itself, not the target of a link.
-    virtual Result<bool> isRegularFile(const URL& item) = 0;
+    virtual Result<bool> isRegularFile(const URL& item) const = 0;
 
     /// The item itself, not the target of a link.
-    virtual Result<ItemState> stateOfItem(const URL& item) = 0;
+    virtual Result<ItemState> stateOfItem(const URL& item) const = 0;
 
     /// An advisory lock (flock(2), exclusive) on the file or directory that the path names when the lock is
     /// taken, even if the path named another one when the wait began. It does not block processes that do not
@@ -129,12 +129,12 @@ class FileManager {
     virtual Result<foundation::Anchor> holdItem(const URL& item) = 0;
 
     /// Main executable of the directory, opened as a bundle.
-    virtual std::optional<URL> mainExecutableOfBundle(const URL& directory) = 0;
+    virtual std::optional<URL> mainExecutableOfBundle(const URL& directory) const = 0;
 
     /// Whether the file system can clone that file (reflink). The probe creates no file, except an
     /// unnamed one if the item is another user's and is only readable. Returns an error if the probe
     /// itself fails.
-    virtual Result<bool> volumeSupportsCloning(const URL& item) = 0;
+    virtual Result<bool> volumeSupportsCloning(const URL& item) const = 0;
 
     /// A fresh directory of mode 0700 beside `item`, named `.pinwell-replacement-` and six random characters.
     virtual Result<URL> createReplacementDirectory(const URL& item) = 0;
@@ -169,7 +169,7 @@ class FileManager {
 
     /// The whole of a regular file of at most kMaximumWholeFile bytes (EFBIG). Follows no link in the last
     /// component (ELOOP), never blocks on anything but a regular file (EINVAL, EISDIR).
-    virtual Result<Data> contentsOfFile(const URL& file) = 0;
+    virtual Result<Data> contentsOfFile(const URL& file) const = 0;
 
     /// Writes a file of mode 0600 and flushes its contents to stable storage. `atomic` writes a file beside
     /// it and renames it into place; only a directory is not replaced. A failure leaves no file behind.
@@ -183,7 +183,7 @@ class FileManager {
     virtual Result<std::unique_ptr<FileHandle>> openForUpdating(const URL& file) = 0;
 
     /// $TMPDIR if it is an absolute path, otherwise /tmp.
-    virtual URL temporaryDirectory() = 0;
+    virtual URL temporaryDirectory() const = 0;
 };
 
 /// The file manager of this machine. `typeNaming` must be callable from any thread. Paths are resolved

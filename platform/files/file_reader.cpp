@@ -7,8 +7,7 @@
 #include <limits>
 #include <utility>
 
-#include "files/file_handle.h"
-#include "files/posix.h"
+#include "files/operations.h"
 
 namespace pinwell::files {
 namespace {
@@ -70,7 +69,8 @@ Result<std::unique_ptr<FileReader>> readerOf(int descriptor, std::string name) {
     if ((flags & O_ACCMODE) == O_WRONLY || (flags & O_PATH) != 0) return Error::posix(EBADF, name);
     struct stat status {};
     if (fstat(descriptor, &status) != 0) return lastError(name);
-    if (const int reason = notRegularReason(status.st_mode); reason != 0) return Error::posix(reason, name);
+    if (const int reason = foundation::notRegularReason(status.st_mode); reason != 0)
+        return Error::posix(reason, name);
     return std::unique_ptr<FileReader>(std::make_unique<DescriptorReader>(descriptor, std::move(name)));
 }
 

@@ -1,5 +1,4 @@
-#include "files/item_lock.h"
-
+// One writer of an item at a time.
 #include <fcntl.h>
 #include <sys/file.h>
 #include <sys/vfs.h>
@@ -8,6 +7,8 @@
 #include <array>
 #include <thread>
 #include <utility>
+
+#include "files/operations.h"
 
 namespace pinwell::files {
 namespace {
@@ -30,7 +31,7 @@ bool isSameItem(const struct stat& one, const struct stat& other) {
 }
 
 Result<FileDescriptor> openToLock(const Place& place) {
-    const auto status = statusOfItem(place);
+    const auto status = place.status();
     if (!status) return status.error();
     if (S_ISDIR(status->st_mode)) return openDirectory(place);
     auto file = openRegularFile(place, O_RDONLY);
@@ -82,7 +83,7 @@ Result<std::unique_ptr<ItemLock>> lockPath(const Places& places, const std::stri
         // The previous holder may have replaced this file by another one, which is then not locked at all.
         struct stat locked {};
         if (fstat(descriptor->get(), &locked) != 0) return lastError(path);
-        const auto named = statusOfItem(*place);
+        const auto named = place->status();
         if (!named) return named.error();
         if (isSameItem(locked, *named))
             return std::unique_ptr<ItemLock>(std::make_unique<DescriptorLock>(*std::move(descriptor)));

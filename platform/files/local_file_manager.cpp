@@ -4,19 +4,10 @@
 #include <utility>
 #include <vector>
 
-#include "files/bundle_executable.h"
-#include "files/cloning.h"
-#include "files/copy.h"
-#include "files/file_handle.h"
-#include "files/file_manager.h"
-#include "files/item_lock.h"
-#include "files/item_properties.h"
-#include "files/posix.h"
-#include "files/removal.h"
-#include "files/replacement.h"
-#include "files/trash.h"
-#include "files/whole_file.h"
+#include "files/operations.h"
+#include "foundation/bundle.h"
 #include "foundation/process.h"
+#include "foundation/value.h"
 
 namespace pinwell::files {
 namespace {
@@ -29,20 +20,54 @@ Result<std::string> pathOf(const URL& url) {
     return url.path();
 }
 
+// `name` is the last component of the item's path.
+Result<ResourceProperties> resourcePropertiesOfItem(const Place& place, const std::string& name,
+                                                    const TypeNaming& typeNaming) {
+    const auto status = place.status();
+    if (!status) return status.error();
+
+    ItemFacts facts;
+    facts.name = name;
+    facts.isDirectory = S_ISDIR(status->st_mode);
+    facts.isRegularFile = S_ISREG(status->st_mode);
+    facts.isSymbolicLink = S_ISLNK(status->st_mode);
+    facts.isExecutable = (status->st_mode & (S_IXUSR | S_IXGRP | S_IXOTH)) != 0;
+
+    const ItemType type = typeNaming(facts);
+    return ResourceProperties{facts.isDirectory,    type.isPackage,  type.isApplication,
+                              facts.isSymbolicLink, type.identifier, type.localizedDescription};
+}
+
+Result<ItemState> stateOfItemAt(const Place& place) {
+    const auto status = place.status();
+    if (!status) return status.error();
+    return ItemState{.device = status->st_dev,
+                     .inode = status->st_ino,
+                     .size = static_cast<std::uint64_t>(status->st_size),
+                     .modifiedSeconds = status->st_mtim.tv_sec,
+                     .modifiedNanoseconds = status->st_mtim.tv_nsec};
+}
+
+Result<bool> itemIsRegularFile(const Place& place) {
+    const auto status = place.status();
+    if (!status) return status.error();
+    return S_ISREG(status->st_mode);
+}
+
 class LocalFileManager final : public FileManager {
   public:
     LocalFileManager(TypeNaming typeNaming, std::shared_ptr<Places> places)
         : typeNaming_(std::move(typeNaming)), places_(std::move(places)) {}
 
-    Result<ResourceProperties> resourceProperties(const URL& item) override {
+    Result<ResourceProperties> resourceProperties(const URL& item) const override {
         return at(item, [&](const Place& place) {
             return resourcePropertiesOfItem(place, item.lastPathComponent(), typeNaming_);
         });
     }
 
-    Result<bool> isRegularFile(const URL& item) override { return at(item, itemIsRegularFile); }
+    Result<bool> isRegularFile(const URL& item) const override { return at(item, itemIsRegularFile); }
 
-    Result<ItemState> stateOfItem(const URL& item) override { return at(item, stateOfItemAt); }
+    Result<ItemState> stateOfItem(const URL& item) const override { return at(item, stateOfItemAt); }
 
     Result<std::unique_ptr<ItemLock>> lockItem(const URL& item,
                                                const std::function<void()>& waiting) override {
@@ -57,11 +82,17 @@ class LocalFileManager final : public FileManager {
         return places_->hold(*path);
     }
 
-    std::optional<URL> mainExecutableOfBundle(const URL& directory) override {
-        return pathOf(directory) ? mainExecutableIn(*places_, directory) : std::nullopt;
+    std::optional<URL> mainExecutableOfBundle(const URL& directory) const override {
+        const auto path = pathOf(directory);
+        if (!path) return std::nullopt;
+        const auto executable = foundation::mainExecutableOfBundle(*places_, *path);
+        if (!executable) return std::nullopt;
+        return URL::fileURLWithPath(*executable);
     }
 
-    Result<bool> volumeSupportsCloning(const URL& item) override { return at(item, fileSupportsCloning); }
+    Result<bool> volumeSupportsCloning(const URL& item) const override {
+        return at(item, fileSupportsCloning);
+    }
 
     Result<URL> createReplacementDirectory(const URL& item) override {
         const auto made = at(item, makeReplacementDirectory);
@@ -101,7 +132,7 @@ class LocalFileManager final : public FileManager {
         return URL::fileURLWithPath(*trashed);
     }
 
-    Result<Data> contentsOfFile(const URL& file) override { return at(file, readWholeFile); }
+    Result<Data> contentsOfFile(const URL& file) const override { return at(file, readWholeFile); }
 
     Result<void> writeFile(ByteView contents, const URL& file, Writing writing) override {
         return at(file, [&](const Place& place) {
@@ -118,12 +149,12 @@ class LocalFileManager final : public FileManager {
         return at(file, [](const Place& place) { return openFileHandle(place, O_RDWR); });
     }
 
-    URL temporaryDirectory() override { return foundation::temporaryDirectory(); }
+    URL temporaryDirectory() const override { return foundation::temporaryDirectory(); }
 
   private:
     // The result of `operation` for the URL's place, or the error if there is none.
     template <class Operation>
-    auto at(const URL& url, Operation operation) -> decltype(operation(std::declval<const Place&>())) {
+    auto at(const URL& url, Operation operation) const -> decltype(operation(std::declval<const Place&>())) {
         const auto path = pathOf(url);
         if (!path) return path.error();
         const auto place = places_->find(*path);
@@ -132,7 +163,7 @@ class LocalFileManager final : public FileManager {
     }
 
     template <class Operation>
-    Result<void> between(const URL& one, const URL& other, Operation operation) {
+    Result<void> between(const URL& one, const URL& other, Operation operation) const {
         return at(one, [&](const Place& first) {
             return at(other, [&](const Place& second) { return operation(first, second); });
         });
@@ -152,6 +183,12 @@ class LocalFileManager final : public FileManager {
 };
 
 }  // namespace
+
+Dictionary ResourceProperties::dictionary() const {
+    return {{"isDirectory", isDirectory},       {"isPackage", isPackage},
+            {"isApplication", isApplication},   {"isSymbolicLink", isSymbolicLink},
+            {"typeIdentifier", typeIdentifier}, {"localizedTypeDescription", localizedTypeDescription}};
+}
 
 std::unique_ptr<FileManager> makeLocalFileManager(TypeNaming typeNaming, std::shared_ptr<Places> places) {
     return std::make_unique<LocalFileManager>(std::move(typeNaming), std::move(places));

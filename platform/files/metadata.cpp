@@ -1,5 +1,4 @@
-#include "files/metadata.h"
-
+// The metadata of a file: owner, mode, extended attributes, access control list, times.
 #include <sys/xattr.h>
 #include <unistd.h>
 
@@ -7,6 +6,8 @@
 #include <array>
 #include <string_view>
 #include <vector>
+
+#include "files/operations.h"
 
 namespace pinwell::files {
 namespace {

@@ -10,78 +10,35 @@
 #include <utility>
 
 namespace pinwell::files {
-namespace {
-
-// Without O_NONBLOCK, a FIFO that replaces the file between the check and the open would block us
-// forever.
-constexpr int kSafeFlags = O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY;
-
-Result<OpenFile> regularFile(FileDescriptor descriptor, Place place) {
-    OpenFile file{std::move(descriptor), std::move(place), {}};
-    if (fstat(file.number(), &file.status) != 0) return lastError(file.path());
-    if (const int reason = notRegularReason(file.status.st_mode); reason != 0)
-        return Error::posix(reason, file.path());
-    return file;
-}
-
-}  // namespace
-
 std::string directoryOf(const std::string& path) {
     const std::size_t slash = path.rfind('/');
     if (slash == std::string::npos) return ".";
     return slash == 0 ? "/" : path.substr(0, slash);
 }
 
-Result<struct stat> statusOfItem(const Place& place) {
-    struct stat status {};
-    const int done = uninterrupted(
-        [&] { return fstatat(place.directory(), place.name.c_str(), &status, AT_SYMLINK_NOFOLLOW); });
-    if (done != 0) return lastError(place.path);
-    return status;
-}
-
-int notRegularReason(mode_t mode) {
-    if (S_ISREG(mode)) return 0;
-    if (S_ISDIR(mode)) return EISDIR;
-    return S_ISLNK(mode) ? ELOOP : EINVAL;
-}
-
-Result<OpenFile> openRegularFile(const Place& place, int access) {
-    // Opening alone can start a device, so the check comes first.
-    const auto before = statusOfItem(place);
-    if (!before) return before.error();
-    if (const int reason = notRegularReason(before->st_mode); reason != 0)
-        return Error::posix(reason, place.path);
-
-    FileDescriptor descriptor(
-        uninterrupted([&] { return openat(place.directory(), place.name.c_str(), access | kSafeFlags); }));
-    if (!descriptor) return lastError(place.path);
-    return regularFile(std::move(descriptor), place);
+Result<OpenFile> openRegularFile(const Place& place, int flags, mode_t mode) {
+    auto file =
+        foundation::openRegularFile(place.directory(), place.name, flags | O_NOFOLLOW, place.path, mode);
+    if (!file) return file.error();
+    return OpenFile{std::move(file->descriptor), place, file->status};
 }
 
 Result<OpenFile> createFile(const Place& place, mode_t mode) {
-    constexpr int kFlags = O_WRONLY | O_CREAT | O_EXCL | kSafeFlags;
-    FileDescriptor descriptor(
-        uninterrupted([&] { return openat(place.directory(), place.name.c_str(), kFlags, mode); }));
-    if (!descriptor) return lastError(place.path);
+    auto descriptor = place.open(O_WRONLY | O_CREAT | O_EXCL, mode);
+    if (!descriptor) return descriptor.error();
     HalfMadeFile halfMade(place);
-    auto file = regularFile(std::move(descriptor), place);
-    if (file) halfMade.keep();
+    OpenFile file{*std::move(descriptor), place, {}};
+    if (fstat(file.number(), &file.status) != 0) return lastError(file.path());
+    halfMade.keep();
     return file;
 }
 
 Result<OpenFile> createTemporaryFileBeside(const Place& place) {
-    constexpr int kFlags = O_RDWR | O_CREAT | O_EXCL | kSafeFlags;
-    Place temporary{place.parent, {}, {}};
-    FileDescriptor descriptor(underFreshName(".pinwell-", temporary.name, [&](const char* name) {
-        return openat(place.directory(), name, kFlags, kPrivateFile);
-    }));
     const std::string directory = directoryOf(place.path);
-    if (!descriptor) return lastError(directory);
-    temporary.path = directory + "/" + temporary.name;
-    HalfMadeFile halfMade(temporary);
-    auto file = regularFile(std::move(descriptor), std::move(temporary));
-    if (file) halfMade.keep();
+    auto file = underFreshName(".pinwell-", [&](const std::string& name) {
+        return createFile({place.parent, name, directory + "/" + name});
+    });
+    if (!file) return Error::posix(static_cast<int>(file.error().code()), directory);
     return file;
 }
 
@@ -97,11 +54,7 @@ std::string freshName(std::string_view prefix) {
 }
 
 Result<FileDescriptor> openDirectory(const Place& place) {
-    constexpr int kFlags = O_RDONLY | O_DIRECTORY | O_CLOEXEC | O_NOFOLLOW;
-    FileDescriptor descriptor(
-        uninterrupted([&] { return openat(place.directory(), place.name.c_str(), kFlags); }));
-    if (!descriptor) return lastError(place.path);
-    return descriptor;
+    return place.open(O_RDONLY | O_DIRECTORY);
 }
 
 Result<void> renameItem(const Place& from, const Place& to) {

@@ -54,41 +54,31 @@ struct OpenFile {
 /// The directory of a path's last component.
 std::string directoryOf(const std::string& path);
 
-/// Status of the item itself, without following a link.
-Result<struct stat> statusOfItem(const Place& place);
-
-/// The errno for an item of this type instead of a regular file; 0 for a regular file.
-int notRegularReason(mode_t mode);
-
-/// Opens an item that is a regular file before and after opening. Never follows a link in the last component,
-/// never blocks, and never opens a device. `access` is O_RDONLY, O_WRONLY or O_RDWR.
-Result<OpenFile> openRegularFile(const Place& place, int access);
-
 /// Modes of a new file: for the owner alone, or for everybody as the umask allows.
 inline constexpr mode_t kPrivateFile = S_IRUSR | S_IWUSR;
 inline constexpr mode_t kOrdinaryFile = S_IRUSR | S_IWUSR | S_IRGRP | S_IWGRP | S_IROTH | S_IWOTH;
 
+/// Like foundation::openRegularFile, without following a link in the last component.
+Result<OpenFile> openRegularFile(const Place& place, int flags, mode_t mode = kPrivateFile);
+
 /// Creates and opens a file for writing; `place` must not exist yet.
 Result<OpenFile> createFile(const Place& place, mode_t mode = kPrivateFile);
 
-/// Creates and opens a hidden file of mode 0600 with a free name, beside the item at `place`.
+/// Creates and opens a hidden file of mode 0600 with a free name, for writing, beside the item at `place`.
 Result<OpenFile> createTemporaryFileBeside(const Place& place);
 
 /// An unguessable name: `prefix` and kRandomLetters letters and digits.
 inline constexpr std::size_t kRandomLetters = 6;
 std::string freshName(std::string_view prefix);
 
-/// Calls `make` with fresh names until one is free: it returns -1, with EEXIST in errno, for a used name.
+/// The result of `make` for the first fresh name that is free: for a used name its error is EEXIST.
 template <class Make>
-int underFreshName(std::string_view prefix, std::string& name, Make make) {
+auto underFreshName(std::string_view prefix, Make make) {
     constexpr int kMaximumTries = 100;  // the 62^6 names of one prefix are never that full
-    int answer = -1;
-    for (int tries = 0; tries < kMaximumTries; ++tries) {
-        name = freshName(prefix);
-        answer = uninterrupted([&] { return make(name.c_str()); });
-        if (answer != -1 || errno != EEXIST) return answer;
-    }
-    return answer;
+    auto made = make(freshName(prefix));
+    for (int tries = 1; tries < kMaximumTries && !made && made.error().code() == EEXIST; ++tries)
+        made = make(freshName(prefix));
+    return made;
 }
 
 /// Opens the directory itself, without following a link.

@@ -1,5 +1,4 @@
-#include "files/removal.h"
-
+// Removal of files and whole trees.
 #include <dirent.h>
 #include <fcntl.h>
 #include <unistd.h>
@@ -9,7 +8,7 @@
 #include <utility>
 #include <vector>
 
-#include "files/posix.h"
+#include "files/operations.h"
 
 namespace pinwell::files {
 namespace {

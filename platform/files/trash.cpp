@@ -1,5 +1,4 @@
-#include "files/trash.h"
-
+// The user's trash, as the freedesktop.org trash specification 1.0 describes it.
 #include <fcntl.h>
 #include <gio/gio.h>
 #include <unistd.h>
@@ -7,6 +6,7 @@
 #include <climits>
 #include <memory>
 
+#include "files/operations.h"
 #include "foundation/lazy_library.h"
 #include "foundation/value.h"
 
@@ -91,13 +91,12 @@ Result<std::string> currentPath(int item, const std::string& path) {
 
 Result<std::string> moveToTrash(const Place& place) {
     const std::string& path = place.path;
-    const FileDescriptor item(uninterrupted(
-        [&] { return openat(place.directory(), place.name.c_str(), O_PATH | O_NOFOLLOW | O_CLOEXEC); }));
-    if (!item) return lastError(path);
+    const auto item = place.open(O_PATH);
+    if (!item) return item.error();
     // Read before the move as well: if the place cannot be found afterwards, it is better not to move. Also,
     // the library removes ".." from the text of a path, which is wrong after a link; the kernel's path has no
     // "..".
-    const auto before = currentPath(item.get(), path);
+    const auto before = currentPath(item->get(), path);
     if (!before) return before.error();
 
     if (!gio().isThere) return Error::posix(ENOSYS, path);
@@ -110,7 +109,7 @@ Result<std::string> moveToTrash(const Place& place) {
             .with(foundation::kUnderlyingErrorKey,
                   Error(gio().quarkToString(owned->domain), owned->code, owned->message));
     }
-    return currentPath(item.get(), path);
+    return currentPath(item->get(), path);
 }
 
 }  // namespace pinwell::files

@@ -1,11 +1,11 @@
-#include "files/whole_file.h"
-
+// Files read, written and replaced whole.
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <string_view>
 #include <utility>
 
-#include "files/posix.h"
+#include "files/operations.h"
 
 namespace pinwell::files {
 namespace {
@@ -23,26 +23,28 @@ Result<void> fill(OpenFile& file, ByteView contents) {
 }
 
 Result<void> overwrite(ByteView contents, const Place& place) {
-    const auto status = statusOfItem(place);
-    if (!status) return status.error();
-    if (const int reason = notRegularReason(status->st_mode); reason != 0)
-        return Error::posix(reason, place.path);
-
     // O_CREAT although the file exists: the kernel's protection against files that others have placed in
-    // shared directories (fs.protected_regular) applies only to creating opens. No O_TRUNC before the second
-    // check.
-    constexpr int kFlags = O_WRONLY | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY;
-    FileDescriptor descriptor(
-        uninterrupted([&] { return openat(place.directory(), place.name.c_str(), kFlags, kPrivateFile); }));
-    if (!descriptor) return lastError(place.path);
-    OpenFile file{std::move(descriptor), place, {}};
-    if (fstat(file.number(), &file.status) != 0) return lastError(place.path);
-    if (const int reason = notRegularReason(file.status.st_mode); reason != 0)
-        return Error::posix(reason, place.path);
+    // shared directories (fs.protected_regular) applies only to creating opens. No O_TRUNC, because the type
+    // is checked once more after the open.
+    auto file = openRegularFile(place, O_WRONLY | O_CREAT);
+    if (!file) return file.error();
+    if (uninterrupted([&] { return ftruncate(file->number(), 0); }) != 0) return lastError(place.path);
+    if (auto done = fill(*file, contents); !done) return done;
+    return closeReporting(*file);
+}
 
-    if (uninterrupted([&] { return ftruncate(file.number(), 0); }) != 0) return lastError(place.path);
-    if (auto done = fill(file, contents); !done) return done;
-    return closeReporting(file);
+constexpr std::string_view kNamePrefix = ".pinwell-replacement-";
+
+bool isReplacementDirectory(std::string_view name) {
+    return name.starts_with(kNamePrefix) && name.size() == kNamePrefix.size() + kRandomLetters;
+}
+
+// The mode is 0700 without the umask's bits, and a set-group-ID parent passes on that bit.
+Result<void> makePrivate(const Place& place) {
+    const auto directory = openDirectory(place);
+    if (!directory) return directory.error();
+    if (uninterrupted([&] { return fchmod(directory->get(), S_IRWXU); }) != 0) return lastError(place.path);
+    return {};
 }
 
 }  // namespace
@@ -82,6 +84,45 @@ Result<void> writeFilePlainly(ByteView contents, const Place& place) {
     if (auto done = flushDirectoryOf(place); !done) return done;
     halfMade.keep();
     return {};
+}
+
+Result<std::string> makeReplacementDirectory(const Place& item) {
+    if (const auto status = item.status(); !status) return status.error();
+    const std::string directory = directoryOf(item.path);
+    const auto made = underFreshName(kNamePrefix, [&](const std::string& name) -> Result<Place> {
+        if (uninterrupted([&] { return mkdirat(item.directory(), name.c_str(), S_IRWXU); }) != 0)
+            return lastError(directory);
+        return Place{item.parent, name, (directory == "/" ? directory : directory + "/") + name};
+    });
+    if (!made) return made.error();
+    if (auto isPrivate = makePrivate(*made); !isPrivate) {
+        unlinkat(made->directory(), made->name.c_str(), AT_REMOVEDIR);
+        return isPrivate.error();
+    }
+    return made->path;
+}
+
+Result<void> replaceFile(const Place& original, const Place& replacement, const Place& emptied) {
+    const auto from = openRegularFile(original, O_RDONLY);
+    if (!from) return from.error();
+    const auto to = openRegularFile(replacement, O_RDONLY);
+    if (!to) return to.error();
+    // rename(2) between two names of one file does nothing.
+    if (from->status.st_dev == to->status.st_dev && from->status.st_ino == to->status.st_ino)
+        return Error::posix(EINVAL, replacement.path);
+    // Opened before the rename, so that a directory that cannot be flushed is not changed.
+    const Place parent{original.parent, ".", directoryOf(original.path)};
+    const auto directory = openDirectory(parent);
+    if (!directory) return directory.error();
+
+    if (auto done = carryMetadata(*from, *to); !done) return done;
+    if (auto done = flush(to->number(), replacement.path); !done) return done;
+    if (auto done = renameItem(replacement, original); !done) return done;
+
+    // Even if the directory cannot be removed (another file in it, for example), the replacement succeeded.
+    if (isReplacementDirectory(emptied.name))
+        unlinkat(emptied.directory(), emptied.name.c_str(), AT_REMOVEDIR);
+    return flush(directory->get(), parent.path);
 }
 
 }  // namespace pinwell::files

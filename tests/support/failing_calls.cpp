@@ -25,25 +25,29 @@ thread_local Trouble* current = nullptr;
 
 constexpr std::size_t kShortCount = 3;
 
-// The calls that POSIX lets a signal interrupt.
-const std::set<std::string>& interruptible() {
-    static const std::set<std::string> calls{
-        "open",  "openat",    "openat2", "close",  "read",  "write",           "pread", "pwrite",
-        "fsync", "ftruncate", "fchmod",  "fchown", "ioctl", "copy_file_range", "flock", "fallocate"};
-    return calls;
-}
+struct CallNature {
+    std::string_view name;
+    bool isInterruptible;  // POSIX lets a signal interrupt it
+    bool moves;            // it may move fewer bytes than requested
+    bool stores;           // it fails on a full or broken volume
+};
 
-// The calls that may move fewer bytes than requested.
-const std::set<std::string>& moving() {
-    static const std::set<std::string> calls{"read", "write", "pread", "pwrite", "copy_file_range"};
-    return calls;
-}
+constexpr std::array kNatures{
+    CallNature{"open", true, false, false},     CallNature{"openat", true, false, false},
+    CallNature{"openat2", true, false, false},  CallNature{"close", true, false, false},
+    CallNature{"flock", true, false, false},    CallNature{"fchmod", true, false, false},
+    CallNature{"fchown", true, false, false},   CallNature{"read", true, true, false},
+    CallNature{"pread", true, true, false},     CallNature{"write", true, true, true},
+    CallNature{"pwrite", true, true, true},     CallNature{"copy_file_range", true, true, true},
+    CallNature{"fallocate", true, false, true}, CallNature{"ftruncate", true, false, true},
+    CallNature{"fsync", true, false, true},     CallNature{"ioctl", true, false, true},
+};
 
-// The calls that fail on a full or broken volume.
-const std::set<std::string>& storing() {
-    static const std::set<std::string> calls{"write", "pwrite", "copy_file_range", "fallocate", "ftruncate",
-                                             "fsync", "ioctl"};
-    return calls;
+// All other calls have none of it.
+CallNature natureOf(std::string_view name) {
+    const auto* const found = std::find_if(kNatures.begin(), kNatures.end(),
+                                           [&](const CallNature& call) { return call.name == name; });
+    return found == kNatures.end() ? CallNature{name, false, false, false} : *found;
 }
 
 bool isStandardStream(int file) {
@@ -105,13 +109,13 @@ bool Trouble::fails(const std::string& name) {
             break;
         case Kind::fromCallOn:
             if (number == number_) failedCall_ = name;
-            failing = number >= number_ && storing().contains(name) && !isShort();
+            failing = number >= number_ && natureOf(name).stores && !isShort();
             break;
         case Kind::atEvery:
             failing = names_.contains(name);
             break;
         case Kind::interruptions:
-            if (!interruptible().contains(name)) break;
+            if (!natureOf(name).isInterruptible) break;
             failing = std::exchange(interrupted_, name) != name;
             break;
     }
@@ -127,7 +131,7 @@ bool Trouble::fails(const std::string& name) {
 bool Trouble::isShort() const noexcept {
     if (kind_ == Kind::shortCounts) return true;
     return (kind_ == Kind::shortAtCall || kind_ == Kind::fromCallOn) && calls_ == number_ + 1 &&
-           moving().contains(failedCall_);
+           natureOf(failedCall_).moves;
 }
 
 void Trouble::noteOpening(int flags) {

@@ -209,17 +209,17 @@ std::vector<FileOperation> RecordingFileManager::changes() const {
     return all;
 }
 
-Result<files::ResourceProperties> RecordingFileManager::resourceProperties(const URL& item) {
+Result<files::ResourceProperties> RecordingFileManager::resourceProperties(const URL& item) const {
     if (auto failure = record_->note("resourceProperties", item.path())) return *failure;
     return real_->resourceProperties(item);
 }
 
-Result<bool> RecordingFileManager::isRegularFile(const URL& item) {
+Result<bool> RecordingFileManager::isRegularFile(const URL& item) const {
     if (auto failure = record_->note("isRegularFile", item.path())) return *failure;
     return real_->isRegularFile(item);
 }
 
-Result<files::ItemState> RecordingFileManager::stateOfItem(const URL& item) {
+Result<files::ItemState> RecordingFileManager::stateOfItem(const URL& item) const {
     if (auto failure = record_->note("stateOfItem", item.path())) return *failure;
     return real_->stateOfItem(item);
 }
@@ -234,12 +234,12 @@ Result<foundation::Anchor> RecordingFileManager::holdItem(const URL& item) {
     return real_->holdItem(item);
 }
 
-std::optional<URL> RecordingFileManager::mainExecutableOfBundle(const URL& directory) {
+std::optional<URL> RecordingFileManager::mainExecutableOfBundle(const URL& directory) const {
     if (record_->note("mainExecutableOfBundle", directory.path())) return std::nullopt;
     return real_->mainExecutableOfBundle(directory);
 }
 
-Result<bool> RecordingFileManager::volumeSupportsCloning(const URL& item) {
+Result<bool> RecordingFileManager::volumeSupportsCloning(const URL& item) const {
     if (auto failure = record_->note("volumeSupportsCloning", item.path())) return *failure;
     if (const auto answer = record_->cloning()) return *answer;
     return real_->volumeSupportsCloning(item);
@@ -279,7 +279,7 @@ Result<URL> RecordingFileManager::trashItem(const URL& item) {
     return place;
 }
 
-Result<Data> RecordingFileManager::contentsOfFile(const URL& file) {
+Result<Data> RecordingFileManager::contentsOfFile(const URL& file) const {
     if (auto failure = record_->note("contentsOfFile", file.path())) return *failure;
     return real_->contentsOfFile(file);
 }
@@ -299,7 +299,7 @@ RecordingFileManager::OpenedHandle RecordingFileManager::openForUpdating(const U
     return recordingHandle(real_->openForUpdating(file), file);
 }
 
-URL RecordingFileManager::temporaryDirectory() {
+URL RecordingFileManager::temporaryDirectory() const {
     return temporaryDirectory_ ? *temporaryDirectory_ : real_->temporaryDirectory();
 }
 

@@ -66,26 +66,26 @@ class RecordingFileManager final : public files::FileManager {
     /// Only operations that change files on disk, with the failed ones. If empty, nothing was written.
     std::vector<FileOperation> changes() const;
 
-    files::Result<files::ResourceProperties> resourceProperties(const files::URL& item) override;
-    files::Result<bool> isRegularFile(const files::URL& item) override;
-    files::Result<files::ItemState> stateOfItem(const files::URL& item) override;
+    files::Result<files::ResourceProperties> resourceProperties(const files::URL& item) const override;
+    files::Result<bool> isRegularFile(const files::URL& item) const override;
+    files::Result<files::ItemState> stateOfItem(const files::URL& item) const override;
     files::Result<std::unique_ptr<files::ItemLock>> lockItem(const files::URL& item,
                                                              const std::function<void()>& waiting) override;
     /// Not recorded: it reads and changes nothing.
     files::Result<foundation::Anchor> holdItem(const files::URL& item) override;
-    std::optional<files::URL> mainExecutableOfBundle(const files::URL& directory) override;
-    files::Result<bool> volumeSupportsCloning(const files::URL& item) override;
+    std::optional<files::URL> mainExecutableOfBundle(const files::URL& directory) const override;
+    files::Result<bool> volumeSupportsCloning(const files::URL& item) const override;
     files::Result<files::URL> createReplacementDirectory(const files::URL& item) override;
     files::Result<void> copyItem(const files::URL& source, const files::URL& destination) override;
     files::Result<void> copyContents(const files::URL& source, const files::URL& destination) override;
     files::Result<void> removeItem(const files::URL& item) override;
     files::Result<void> replaceItem(const files::URL& original, const files::URL& replacement) override;
     files::Result<files::URL> trashItem(const files::URL& item) override;
-    files::Result<files::Data> contentsOfFile(const files::URL& file) override;
+    files::Result<files::Data> contentsOfFile(const files::URL& file) const override;
     files::Result<void> writeFile(files::ByteView contents, const files::URL& file, Writing writing) override;
     files::Result<std::unique_ptr<files::FileHandle>> openForReading(const files::URL& file) override;
     files::Result<std::unique_ptr<files::FileHandle>> openForUpdating(const files::URL& file) override;
-    files::URL temporaryDirectory() override;
+    files::URL temporaryDirectory() const override;
 
   private:
     class Record;

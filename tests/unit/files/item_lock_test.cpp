@@ -1,5 +1,5 @@
 // One writer at a time, even if the file is replaced while they wait.
-#include "files/item_lock.h"
+#include "files/operations.h"
 
 #include <fcntl.h>
 #include <sys/file.h>

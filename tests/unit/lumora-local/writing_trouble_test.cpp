@@ -22,6 +22,12 @@ using pinwell::test::TemporaryDirectory;
 using pinwell::test::Trouble;
 using testing::IsSupersetOf;
 
+// At least these calls make a new file, and each of them fails once.
+const struct {
+    std::set<std::string> tried{"open", "write", "fsync"};
+    std::set<std::string> storing{"write", "fsync"};  // on a volume without room
+} kCallsOfANewFile;
+
 std::set<std::string> namesIn(const std::string& directory) {
     std::set<std::string> names;
     for (const auto& entry : std::filesystem::directory_iterator(directory))
@@ -70,7 +76,7 @@ TEST(Samples, AreAllWrittenOrNoneForEveryFailingCall) {
     const KeptRsaKeys keys;
     EXPECT_THAT(failEachCall([](std::size_t number) { return Trouble::atCall(number, EIO); }, writeAllSamples,
                              kAllSamples),
-                IsSupersetOf({"open", "write", "fsync"}));
+                IsSupersetOf(kCallsOfANewFile.tried));
 }
 
 TEST(Samples, AreWrittenThroughInterruptions) {
@@ -88,7 +94,7 @@ TEST(NewFile, IsRemovedIfTheWriteFails) {
     };
     EXPECT_THAT(
         failEachCall([](std::size_t number) { return Trouble::fromCallOn(number, ENOSPC); }, write, {"file"}),
-        IsSupersetOf({"write", "fsync"}));
+        IsSupersetOf(kCallsOfANewFile.storing));
 }
 
 TEST(NewFile, KeepsAnExistingFile) {
@@ -105,7 +111,7 @@ TEST(PendingDirectory, IsRemovedIfItCannotBePublished) {
         pending.publish();
     };
     EXPECT_THAT(failEachCall([](std::size_t number) { return Trouble::atCall(number, EIO); }, write, {"new"}),
-                IsSupersetOf({"open", "write", "fsync"}));
+                IsSupersetOf(kCallsOfANewFile.tried));
 }
 
 }  // namespace

@@ -1,3 +1,4 @@
+// Facts about an item: its properties, its state, and the main executable of a bundle.
 #include <cstdlib>
 
 #include "fixture.h"
@@ -172,6 +173,26 @@ TEST_F(TemporaryDirectoryQuestion, IsTheEnvironmentsWhenAbsolute) {
     unsetenv("TMPDIR");
     EXPECT_EQ(manager->temporaryDirectory().path(), "/tmp");
     if (kept) setenv("TMPDIR", kept->c_str(), 1);
+}
+
+// The bundle's main executable.
+using BundleExecutable = FilesTest;
+
+TEST_F(BundleExecutable, IsTheFileNamedAsTheBundleIs) {
+    writeFile(path("Tool.app/Contents/Linux/Tool"), "x");
+    const auto executable = manager->mainExecutableOfBundle(url("Tool.app"));
+    ASSERT_TRUE(executable.has_value());
+    EXPECT_EQ(*executable, url("Tool.app/Contents/Linux/Tool"));
+}
+
+TEST_F(BundleExecutable, IsNotHadOfAnEmptyDirectory) {
+    makeDirectory(path("Tool.app"));
+    EXPECT_EQ(manager->mainExecutableOfBundle(url("Tool.app")), std::nullopt);
+}
+
+TEST_F(BundleExecutable, ReturnsNulloptForNonFileUrl) {
+    EXPECT_EQ(manager->mainExecutableOfBundle(*files::URL::fromString("https://host.example/Tool.app")),
+              std::nullopt);
 }
 
 }  // namespace
