@@ -23,12 +23,12 @@ class Domain final : public UserDefaults {
         for (auto& [key, value] : defaults) registered_.insert_or_assign(key, std::move(value));
     }
 
-    std::string stringForKey(std::string_view key) override {
+    std::string stringForKey(std::string_view key) const override {
         const std::string* text = find(key, &Value::string);
         return text == nullptr ? std::string() : *text;
     }
 
-    bool boolForKey(std::string_view key) override {
+    bool boolForKey(std::string_view key) const override {
         const bool* flag = find(key, &Value::boolean);
         return flag != nullptr && *flag;
     }

@@ -20,8 +20,8 @@ class UserDefaults {
   public:
     virtual ~UserDefaults() = default;
     virtual void registerDefaults(foundation::Dictionary defaults) = 0;
-    virtual std::string stringForKey(std::string_view key) = 0;  // empty if neither has it
-    virtual bool boolForKey(std::string_view key) = 0;           // false if neither has it
+    virtual std::string stringForKey(std::string_view key) const = 0;  // empty if neither has it
+    virtual bool boolForKey(std::string_view key) const = 0;           // false if neither has it
 };
 
 class UserDefaultsService {

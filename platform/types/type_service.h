@@ -23,16 +23,16 @@ class TypeService {
     virtual ~TypeService() = default;
 
     /// The identifier, from the name's extension (case-insensitive) and the kind.
-    virtual std::string typeIdentifier(const Item& item) = 0;
+    virtual std::string typeIdentifier(const Item& item) const = 0;
 
     /// A short lower-case English noun, in every locale.
-    virtual std::string localizedDescription(const Item& item) = 0;
+    virtual std::string localizedDescription(const Item& item) const = 0;
 
     /// Equal, or declared to conform directly or through parents.
-    virtual bool conforms(std::string_view identifier, std::string_view to) = 0;
+    virtual bool conforms(std::string_view identifier, std::string_view to) const = 0;
 
     /// Whether the identifier was generated for an undeclared type.
-    virtual bool isDynamic(std::string_view identifier) = 0;
+    virtual bool isDynamic(std::string_view identifier) const = 0;
 };
 
 /// Whether to use the freedesktop.org shared MIME database for undeclared types. That opens its library,

@@ -17,14 +17,14 @@ class FakeUserDefaults final : public defaults::UserDefaults {
         registered_ = std::move(defaults);
     }
 
-    std::string stringForKey(std::string_view key) override {
+    std::string stringForKey(std::string_view key) const override {
         if (const auto found = chosen_.find(key); found != chosen_.end() && found->second.string() != nullptr)
             return *found->second.string();
         const auto found = registered_.find(key);
         return found != registered_.end() && found->second.string() != nullptr ? *found->second.string() : "";
     }
 
-    bool boolForKey(std::string_view key) override {
+    bool boolForKey(std::string_view key) const override {
         if (const auto found = chosen_.find(key);
             found != chosen_.end() && found->second.boolean() != nullptr)
             return *found->second.boolean();

@@ -63,10 +63,10 @@ TEST_F(FileKind, AGenericPackageIsABundleByItsExtensionAlone) {
 class ManifoldType final : public types::TypeService {
   public:
     explicit ManifoldType(std::set<std::string_view> all) : all_(std::move(all)) {}
-    std::string typeIdentifier(const types::Item&) override { return "manifold"; }
-    std::string localizedDescription(const types::Item&) override { return "manifold"; }
-    bool conforms(std::string_view, std::string_view to) override { return all_.contains(to); }
-    bool isDynamic(std::string_view) override { return false; }
+    std::string typeIdentifier(const types::Item&) const override { return "manifold"; }
+    std::string localizedDescription(const types::Item&) const override { return "manifold"; }
+    bool conforms(std::string_view, std::string_view to) const override { return all_.contains(to); }
+    bool isDynamic(std::string_view) const override { return false; }
 
   private:
     std::set<std::string_view> all_;
