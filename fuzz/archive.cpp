@@ -2,21 +2,16 @@
 #include <xar/xar.h>
 
 #include <algorithm>
-#include <cstdlib>
 #include <cstring>
-#include <memory>
 
 #include "foundation/byte_reader.h"
 #include "scratch_file.h"
+#include "signed_data.h"
 #include "target.h"
 #include "xar/header.h"
 
 namespace pinwell::fuzz {
 namespace {
-
-struct FreeMemory {
-    void operator()(void* memory) const noexcept { std::free(memory); }
-};
 
 /// The checksum of the table of contents of an opened archive.
 Data computedChecksum(ByteView archive) {
@@ -31,12 +26,7 @@ Data computedChecksum(ByteView archive) {
 
 void examineSignature(xar_signature_t signature, const Data& checksum) {
     if (const char* type = xar_signature_type(signature)) static_cast<void>(std::strlen(type));
-    std::uint8_t* bytes = nullptr;
-    std::uint32_t length = 0;
-    const auto status = xar_signature_copy_signed_data(signature, &bytes, &length, nullptr, nullptr, nullptr);
-    const std::unique_ptr<std::uint8_t, FreeMemory> owner(bytes);
-    require(status == 0, "a signature signs something");
-    require(foundation::toData(std::as_bytes(std::span(bytes, length))) == checksum && !checksum.empty(),
+    require(signedDataOf(signature) == checksum && !checksum.empty(),
             "what is signed is the checksum of the table");
 }
 

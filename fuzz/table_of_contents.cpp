@@ -2,12 +2,17 @@
 // fuzzer, and in an archive that is made around it.
 #include "xar/table_of_contents.h"
 
+#include <xar/xar.h>
+
 #include <algorithm>
+#include <optional>
+#include <string>
+#include <vector>
 
 #include "scratch_file.h"
+#include "signed_data.h"
 #include "support/archive_builder.h"
 #include "target.h"
-#include "xar/archive.h"
 
 namespace pinwell::fuzz {
 namespace {
@@ -45,10 +50,18 @@ void examine(ByteView input) {
 
     const auto builder = test::ArchiveBuilder().toc(foundation::toString(input));
     const ScratchFile file(builder.build());
-    const auto archive = xar::Archive::open(file.path());
-    if (!archive) return;
-    require(archive->table().signatures == whole->signatures, "an archive says what its table says");
-    require(archive->checksum() == builder.rightChecksum(), "what is signed is the checksum of the table");
+    xar_t archive = xar_open(file.path().c_str(), 0);
+    if (archive == nullptr) return;
+    std::vector<std::optional<std::string>> styles;
+    for (auto signature = xar_signature_first(archive); signature != nullptr;
+         signature = xar_signature_next(signature)) {
+        const char* const style = xar_signature_type(signature);
+        styles.push_back(style == nullptr ? std::nullopt : std::optional<std::string>(style));
+        require(signedDataOf(signature) == builder.rightChecksum(),
+                "what is signed is the checksum of the table");
+    }
+    require(styles == whole->signatures, "an archive says what its table says");
+    xar_close(archive);
 }
 
 }  // namespace pinwell::fuzz

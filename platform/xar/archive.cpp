@@ -1,15 +1,27 @@
-#include "xar/archive.h"
+// An open archive: its file, its table of contents, and the functions of <xar/xar.h> over them.
+#include <xar/xar.h>
 
 #include <fcntl.h>
+#include <sys/types.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <charconv>
+#include <cstdlib>
+#include <exception>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
 #include <utility>
+#include <vector>
 
-#include "xar/digest.h"
+#include "foundation/bytes.h"
+#include "foundation/file_io.h"
+#include "xar/header.h"
 #include "xar/inflater.h"
+#include "xar/table_of_contents.h"
 
 namespace pinwell::xar {
 namespace {
@@ -42,6 +54,36 @@ std::optional<std::uint64_t> leadingNumber(const std::optional<std::string>& tex
 }
 
 }  // namespace
+
+// The file of an open archive, and its table of contents.
+class Archive {
+  public:
+    /// Opens the archive at `path`, and compares its table of contents with the checksum in the heap. Returns
+    /// null if they differ or one cannot be read. Returns null too for an archive with signatures but without
+    /// a checksum algorithm, because its signatures would cover nothing. Throws std::bad_alloc.
+    static std::unique_ptr<Archive> open(const std::string& path);
+
+    const TableOfContents& table() const noexcept { return table_; }
+
+    /// The checksum of the table of contents, computed and compared with the heap by open(). Empty for an
+    /// archive without an algorithm, which has no signatures.
+    const foundation::Data& checksum() const noexcept { return checksum_; }
+
+  private:
+    Archive() = default;
+
+    bool openFile(const std::string& path);
+    std::optional<foundation::Data> read(std::uint64_t offset, std::size_t length) const;
+    bool readTable(const Header& header);
+    bool isChecksumDescribed(DigestAlgorithm algorithm) const;
+    bool isChecksumStored() const;
+
+    foundation::FileDescriptor file_;
+    std::uint64_t fileSize_ = 0;
+    std::uint64_t heapStart_ = 0;
+    TableOfContents table_;
+    foundation::Data checksum_;
+};
 
 std::unique_ptr<Archive> Archive::open(const std::string& path) {
     std::unique_ptr<Archive> archive(new Archive);
@@ -129,3 +171,93 @@ bool Archive::isChecksumStored() const {
 }
 
 }  // namespace pinwell::xar
+
+using pinwell::xar::Archive;
+
+// A signature has its archive and its number, which lead to its style, the checksum and the next signature.
+struct xar_archive_signature {
+    xar_t archive;
+    std::size_t number;
+};
+
+struct xar_archive {
+    explicit xar_archive(std::unique_ptr<const Archive> opened) : contents(std::move(opened)) {
+        for (std::size_t number = 0; number < contents->table().signatures.size(); ++number)
+            signatures.push_back({this, number});
+    }
+    xar_archive(const xar_archive&) = delete;
+    xar_archive& operator=(const xar_archive&) = delete;
+
+    xar_signature_t signature(std::size_t number) const {
+        return number < signatures.size() ? &signatures[number] : nullptr;
+    }
+
+    std::unique_ptr<const Archive> contents;
+    std::vector<xar_archive_signature> signatures;
+};
+
+namespace {
+
+constexpr int32_t kReading = 0;
+constexpr int kFailure = -1;
+
+}  // namespace
+
+xar_t xar_open(const char* file, int32_t flags) {
+    if (file == nullptr || flags != kReading) return nullptr;
+    try {
+        auto archive = Archive::open(file);
+        return archive ? new xar_archive(std::move(archive)) : nullptr;
+    } catch (const std::exception&) {
+        return nullptr;
+    }
+}
+
+int xar_close(xar_t x) {
+    delete x;
+    return 0;
+}
+
+xar_signature_t xar_signature_first(xar_t x) {
+    return x->signature(0);
+}
+
+xar_signature_t xar_signature_next(xar_signature_t s) {
+    return s->archive->signature(s->number + 1);
+}
+
+char* xar_signature_type(xar_signature_t s) {
+    const auto& style = s->archive->contents->table().signatures[s->number];
+    return style ? const_cast<char*>(style->c_str())
+                 : nullptr;  // borrowed, though the prototype does not say so
+}
+
+uint8_t xar_signature_copy_signed_data(xar_signature_t sig, uint8_t** data, uint32_t* length,
+                                       uint8_t** signed_data, uint32_t* signed_length,
+                                       uint32_t* signed_offset) {
+    constexpr auto kFailed = static_cast<uint8_t>(kFailure);
+    if (data == nullptr || length == nullptr) return kFailed;
+    if (signed_data != nullptr || signed_length != nullptr || signed_offset != nullptr) return kFailed;
+    const auto& checksum = sig->archive->contents->checksum();
+    if (checksum.empty()) return kFailed;
+    // The caller frees it, as the prototype says.
+    auto* const copy = static_cast<uint8_t*>(std::malloc(checksum.size()));  // NOLINT(*-no-malloc)
+    if (copy == nullptr) return kFailed;
+    std::transform(checksum.begin(), checksum.end(), copy,
+                   [](std::byte byte) { return std::to_integer<uint8_t>(byte); });
+    *data = copy;
+    *length = static_cast<uint32_t>(checksum.size());
+    return 0;
+}
+
+int32_t xar_prop_get(xar_file_t f, const char* key, const char** value) {
+    if (value == nullptr) return kFailure;
+    *value = nullptr;
+    if (f == nullptr || key == nullptr) return kFailure;
+    const xar_t archive = reinterpret_cast<xar_t>(f);
+    const auto& properties = archive->contents->table().properties;
+    const auto found = properties.find(std::string_view(key));
+    if (found == properties.end()) return kFailure;
+    if (found->second) *value = found->second->c_str();
+    return 0;
+}

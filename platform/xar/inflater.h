@@ -1,4 +1,4 @@
-// Unpacks a zlib stream (RFC 1950), piece by piece. For this folder only.
+// Unpacks a zlib stream (RFC 1950), piece by piece.
 #pragma once
 
 #include <cstdint>

@@ -1,4 +1,4 @@
-// The table of contents: an XML document, of which a few values are kept. For this folder only.
+// The table of contents: an XML document, of which a few values are kept.
 //
 //   <xar>
 //     <toc>
