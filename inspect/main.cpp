@@ -18,7 +18,6 @@
 #include "inspect/gather.h"
 #include "inspect/render_json.h"
 #include "inspect/render_text.h"
-#include "sandbox/runaway.h"
 #include "sandbox/sandbox.h"
 #include "src/confinement.h"
 #include "src/messages.h"

@@ -8,7 +8,7 @@
 #include "defaults/user_defaults.h"
 #include "foundation/lazy_library.h"
 #include "foundation/process.h"
-#include "sandbox/runaway.h"
+#include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/messages.h"
 #include "src/ticket_record.h"

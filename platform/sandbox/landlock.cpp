@@ -1,5 +1,4 @@
-#include "sandbox/landlock.h"
-
+// Landlock: gives up rights to files and TCP permanently.
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
@@ -12,11 +11,14 @@
 #include <system_error>
 
 #include "foundation/file_io.h"
+#include "sandbox/facilities.h"
 
 namespace pinwell::sandbox {
 namespace {
 
+using foundation::Error;
 using foundation::FileDescriptor;
+using foundation::Result;
 
 // The kernel's numbers (include/uapi/linux/landlock.h). Defined here because the headers of Linux 6.1, on
 // Debian 12, lack some of them.
@@ -80,8 +82,11 @@ std::uint64_t deniedNetworkRights(int version, Network network) {
     return network == Network::connect ? std::uint64_t{bindTcp} : bindTcp | connectTcp;
 }
 
-std::string lastReason() {
-    return std::generic_category().message(errno);
+// The last call's error, for the file of a rule or for Landlock itself.
+Error lastError(const std::string& about = {}) {
+    const int reason = errno;
+    const std::string text = std::generic_category().message(reason);
+    return {foundation::kPOSIXErrorDomain, reason, about.empty() ? text : about + ": " + text};
 }
 
 // A rule is for one inode. Network file systems of this type may give a file a new inode at any time.
@@ -91,34 +96,39 @@ bool keepsInodes(int place) {
     return fstatfs(place, &fileSystem) != 0 || static_cast<std::uint32_t>(fileSystem.f_type) != kPlan9;
 }
 
-std::optional<std::string> addRule(int ruleset, const FileRule& rule, std::uint64_t known) {
+Result<void> addRule(int ruleset, const FileRule& rule, std::uint64_t known) {
     const FileDescriptor place(open(rule.path.c_str(), O_PATH | O_CLOEXEC));
     struct stat status {};
-    if (!place || fstat(place.get(), &status) != 0) return std::nullopt;  // it does not exist
-    if (!keepsInodes(place.get())) return rule.path + ": the file system (9P) does not keep it";
+    if (!place || fstat(place.get(), &status) != 0) return {};  // it does not exist
+    if (!keepsInodes(place.get()))
+        return Error(foundation::kPOSIXErrorDomain, EOPNOTSUPP,
+                     rule.path + ": the file system (9P) does not keep it");
     PathRule added;
     added.rights = (rule.access == Access::write ? kWriteRights : kReadRights) & known;
     if (!S_ISDIR(status.st_mode)) added.rights &= kRightsToOneFile;
     added.parent = place.get();
-    if (syscall(SYS_landlock_add_rule, ruleset, kPathRule, &added, 0U) == 0) return std::nullopt;
-    if (errno == EBADFD) return std::nullopt;  // a pipe or a socket: always readable
-    return rule.path + ": " + lastReason();
+    if (syscall(SYS_landlock_add_rule, ruleset, kPathRule, &added, 0U) == 0) return {};
+    if (errno == EBADFD) return {};  // a pipe or a socket: always readable
+    return lastError(rule.path);
 }
 
-}  // namespace
-
+// Version of the kernel's Landlock; 0, with errno set, without it.
 int landlockVersion() {
     const long version = syscall(SYS_landlock_create_ruleset, nullptr, std::size_t{0}, kVersionQuestion);
     return version < 0 ? 0 : static_cast<int>(version);
 }
 
-std::optional<std::string> restrictFiles(const FileRules& files, Network network) {
+}  // namespace
+
+Result<void> restrictFiles(const FileRules& files, Network network) {
     const int version = landlockVersion();
-    if (version == 0) return lastReason();
+    if (version == 0) return lastError();
     // The first version forbids every rename between directories, but replacing a file needs one.
     const bool writes = std::any_of(files.begin(), files.end(),
                                     [](const FileRule& rule) { return rule.access == Access::write; });
-    if (writes && version < kVersionWithRenames) return "this kernel's version of it forbids renaming files";
+    if (writes && version < kVersionWithRenames)
+        return Error(foundation::kPOSIXErrorDomain, EOPNOTSUPP,
+                     "this kernel's version of it forbids renaming files");
 
     RulesetAttributes attributes;
     attributes.files = knownFileRights(version);
@@ -126,11 +136,11 @@ std::optional<std::string> restrictFiles(const FileRules& files, Network network
     if (version >= kVersionWithScopes) attributes.scopes = abstractSockets | signalSending;
     const FileDescriptor ruleset(
         static_cast<int>(syscall(SYS_landlock_create_ruleset, &attributes, sizeof attributes, 0U)));
-    if (!ruleset) return lastReason();
+    if (!ruleset) return lastError();
     for (const FileRule& rule : files)
-        if (auto reason = addRule(ruleset.get(), rule, attributes.files)) return reason;
-    if (syscall(SYS_landlock_restrict_self, ruleset.get(), 0U) != 0) return lastReason();
-    return std::nullopt;
+        if (auto added = addRule(ruleset.get(), rule, attributes.files); !added) return added;
+    if (syscall(SYS_landlock_restrict_self, ruleset.get(), 0U) != 0) return lastError();
+    return {};
 }
 
 }  // namespace pinwell::sandbox

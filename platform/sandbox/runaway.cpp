@@ -1,5 +1,4 @@
-#include "sandbox/runaway.h"
-
+// Ends a process that uses far more processor time or stack than its input can need.
 #include <sys/resource.h>
 #include <unistd.h>
 
@@ -9,6 +8,7 @@
 
 #include "foundation/sanitized.h"
 #include "foundation/stack_guard.h"
+#include "sandbox/sandbox.h"
 
 namespace pinwell::sandbox {
 namespace {

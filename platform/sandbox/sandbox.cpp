@@ -7,8 +7,7 @@
 #include <utility>
 
 #include "foundation/sanitized.h"
-#include "sandbox/landlock.h"
-#include "sandbox/system_calls.h"
+#include "sandbox/facilities.h"
 
 namespace pinwell::sandbox {
 
@@ -23,10 +22,10 @@ std::vector<std::string> confine(const Confinement& confinement) {
     rules.push_back({PINWELL_COUNTS_DIRECTORY, Access::write});  // for a build that counts executed lines
 #endif
     const auto files = restrictFiles(rules, confinement.network);
-    if (files) missing.push_back("Landlock is not in force: " + *files);
+    if (!files) missing.push_back("Landlock is not in force: " + files.error().localizedFailureReason());
     const auto calls =
-        restrictCalls(confinement.calls, confinement.network, files ? FilesAre::open : FilesAre::restricted);
-    if (calls) missing.push_back("seccomp is not in force: " + *calls);
+        restrictCalls(confinement.calls, confinement.network, files ? FilesAre::restricted : FilesAre::open);
+    if (!calls) missing.push_back("seccomp is not in force: " + calls.error().localizedFailureReason());
     return missing;
 }
 

@@ -1,6 +1,8 @@
-// Gives up the rights of a process that it does not need, before it reads untrusted bytes.
+// What a process does to itself before it reads untrusted bytes: it gives up the rights that it does not
+// need, and limits its processor time and stack.
 //
-// Uses two facilities of the Linux kernel. Both are permanent, and bind every later thread and child:
+// Confinement uses two facilities of the Linux kernel. Both are permanent, and bind every later thread and
+// child:
 //
 //   Landlock   which files may be read and written, and whether TCP may be used (landlock(7), Linux 5.13)
 //   seccomp    which system calls may be made (seccomp(2), through libseccomp)
@@ -10,8 +12,14 @@
 //
 // Landlock restricts opening, creating, renaming and removing. It does not restrict stat(2), chmod(2),
 // chown(2), utimensat(2), or connecting to a socket in the file system.
+//
+// The limits end a process that uses far more than its input can need: with one line and an exit status,
+// instead of a hanging build or a crash. Every reader bounds its work, so this is for cases that the bounds
+// miss, for example in a library.
 #pragma once
 
+#include <atomic>
+#include <cstdint>
 #include <string>
 #include <vector>
 
@@ -93,5 +101,27 @@ FileRules typeDatabaseFiles();
 
 /// `more` at the end of `rules`.
 void append(FileRules& rules, FileRules more);
+
+/// The limit of processor time, in seconds, for input of that many bytes: 60 s for reading (the slowest known
+/// input takes 2 s), and a second for every MiB. Even a processor without hash instructions hashes ten times
+/// as fast.
+std::uint64_t processorSecondsFor(std::uint64_t bytes);
+
+struct RunawayEnd {
+    /// The descriptor for the line; -1 for none.
+    int descriptor = 1;
+    /// Lines without newlines.
+    std::string processorTime;
+    std::string stack;
+    /// Read at the end; must live as long as the process.
+    const std::atomic<std::int32_t>* exitStatus = nullptr;
+};
+
+/// From now on this process ends in this way if it has used `processorSeconds` in all, or if a thread with a
+/// foundation::StackGuard exceeds its stack. The main thread's stack has at most 8 MiB. A lower limit that
+/// the caller has set stays. If the time runs out during a write, the end waits for the write
+/// (foundation::SignalDeferral). Call it before there is a second thread, and before the main thread's guard.
+/// Other crashes are not changed; in builds with sanitizers, stacks are not limited either.
+void limitRunaways(std::uint64_t processorSeconds, RunawayEnd end);
 
 }  // namespace pinwell::sandbox

@@ -1,5 +1,4 @@
-#include "sandbox/system_calls.h"
-
+// seccomp: gives up system calls permanently.
 #include <asm/ioctls.h>
 #include <asm/termbits.h>
 #include <fcntl.h>
@@ -18,6 +17,7 @@
 
 #include "foundation/handle.h"
 #include "foundation/sanitized.h"
+#include "sandbox/facilities.h"
 
 namespace pinwell::sandbox {
 namespace {
@@ -226,13 +226,14 @@ Rules readingRules(FilesAre files) {
 
 }  // namespace
 
-std::optional<std::string> restrictCalls(Calls calls, Network network, FilesAre files) {
+foundation::Result<void> restrictCalls(Calls calls, Network network, FilesAre files) {
     Rules rules = calls == Calls::reading ? readingRules(files) : serviceRules(network);
     const int failure = rules.load();
-    if (failure == 0) return std::nullopt;
-    // The library's code for every refusal of the kernel.
-    if (failure == ECANCELED) return "the kernel refuses it";
-    return std::generic_category().message(failure);
+    if (failure == 0) return {};
+    // ECANCELED is the library's code for every refusal of the kernel.
+    return foundation::Error(
+        foundation::kPOSIXErrorDomain, failure,
+        failure == ECANCELED ? "the kernel refuses it" : std::generic_category().message(failure));
 }
 
 }  // namespace pinwell::sandbox

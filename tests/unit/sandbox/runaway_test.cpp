@@ -1,5 +1,5 @@
 // The end of a process that runs away. Each is a child, because its limits cannot be lifted.
-#include "sandbox/runaway.h"
+#include "sandbox/sandbox.h"
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
