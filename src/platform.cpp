@@ -1,6 +1,6 @@
 #include "src/platform.h"
 
-#include "https/session_options.h"
+#include "https/session.h"
 #include "src/PWHashedFile/file_kind.h"
 
 namespace pinwell {

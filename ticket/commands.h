@@ -9,7 +9,7 @@
 
 #include "companion/command_line.h"
 #include "companion/streams.h"
-#include "https/client_identity.h"
+#include "https/session.h"
 #include "retrieval/retry_policy.h"
 #include "src/platform.h"
 

@@ -14,7 +14,7 @@
 #include "crypto/crypto.h"
 #include "foundation/process.h"
 #include "foundation/utf8.h"
-#include "https/client_identity.h"
+#include "https/session.h"
 #include "retrieval/ticket_request.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"

@@ -8,7 +8,7 @@
 #include "companion/process.h"
 #include "companion/streams.h"
 #include "foundation/format.h"
-#include "https/session_options.h"
+#include "https/session.h"
 #include "retrieval/ticket_request.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/cdhash_extract.h"

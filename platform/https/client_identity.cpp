@@ -1,5 +1,4 @@
-#include "https/client_identity.h"
-
+// Reads a session's identity from its files, and installs it in a TLS context.
 #include <openssl/err.h>
 #include <openssl/pem.h>
 #include <openssl/ssl.h>
@@ -8,13 +7,10 @@
 #include "foundation/format.h"
 #include "foundation/handle.h"
 #include "foundation/secret_file.h"
-#include "https/server_trust.h"
+#include "https/connection.h"
 
 namespace pinwell::https {
 namespace {
-
-using foundation::Error;
-using foundation::Result;
 
 using BioHandle = foundation::Handle<BIO, BIO_free>;
 using CertificateHandle = foundation::Handle<X509, X509_free>;

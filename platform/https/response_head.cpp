@@ -1,11 +1,9 @@
-#include "https/response_head.h"
+#include "https/http_message.h"
 
 #include <algorithm>
 #include <array>
 #include <charconv>
 #include <limits>
-
-#include "https/field_syntax.h"
 
 namespace pinwell::https {
 namespace {
@@ -14,6 +12,10 @@ constexpr std::string_view kBlank = " \t";
 
 // The fields that the transfer library uses. It may see only the first line of a folded one.
 constexpr std::array<std::string_view, 3> kFieldsOnOneLine{"Content-Length", "Transfer-Encoding", "Location"};
+
+bool isDigit(char c) noexcept {
+    return c >= '0' && c <= '9';
+}
 
 std::string_view trimmed(std::string_view text) {
     text.remove_prefix(std::min(text.find_first_not_of(kBlank), text.size()));

@@ -11,17 +11,87 @@
 
 #include "foundation/process.h"
 #include "foundation/stack_guard.h"
-#include "https/challenge.h"
-#include "https/download_file.h"
-#include "https/redirect.h"
-#include "https/session_options.h"
+#include "foundation/value.h"
+#include "https/body_sink.h"
+#include "https/http_message.h"
 #include "https/transfer.h"
 #include "https/transfer_error.h"
 
 namespace pinwell::https {
 namespace {
 
-using foundation::Result;
+// The delegate, and its queue.
+struct ChallengeContext {
+    Session& session;
+    SessionDelegate& delegate;
+    foundation::SerialQueue& queue;
+    trust::TrustService& trust;
+};
+
+// The policy of a trust object until the delegate chooses one: only the platform's anchors, for this host. So
+// a delegate that forgets to choose is too strict, not too lax.
+trust::PolicyRef initialPolicy(const std::string& host) {
+    namespace option = trust::option;
+    trust::Policy policy;
+    policy.oid = "1.3.6.1.5.5.7.3.1";  // id-kp-serverAuth, RFC 5280, section 4.2.1.12
+    policy.options.emplace(option::kHostName, host);
+    policy.options.emplace(option::kPlatformAnchor, foundation::Dictionary{});
+    for (const auto check : {option::kServerAuthentication, option::kValidityDates, option::kBasicConstraints,
+                             option::kNameConstraints, option::kCriticalExtensions, option::kIdLinkage})
+        policy.options.emplace(check, true);
+    return std::make_shared<const trust::Policy>(std::move(policy));
+}
+
+std::shared_ptr<trust::Trust> makeTrust(const trust::TrustService& service, const std::string& host,
+                                        const std::vector<Data>& list) {
+    std::vector<trust::CertificateRef> certificates;
+    for (const Data& der : list) {
+        certificates.push_back(service.parseCertificate(der));
+        if (!certificates.back()) return nullptr;
+    }
+    const auto trust = service.makeTrust(std::move(certificates), initialPolicy(host));
+    return trust ? *trust : nullptr;
+}
+
+// Outlives the delegate's call, because a faulty delegate may keep the completion and call it later.
+struct Answer {
+    std::mutex mutex;
+    bool given = false;
+    bool accepted = false;
+};
+
+bool ask(const ChallengeContext& context, const std::string& host,
+         const std::shared_ptr<trust::Trust>& trust) {
+    const auto answer = std::make_shared<Answer>();
+    const auto completion = [answer, wanted = std::weak_ptr(trust)](
+                                Disposition disposition, const std::optional<Credential>& credential) {
+        const std::lock_guard lock(answer->mutex);
+        if (answer->given) return;
+        answer->given = true;
+        answer->accepted = disposition == Disposition::useCredential && credential && credential->trust &&
+                           credential->trust == wanted.lock();
+    };
+    context.queue.sync([&] {
+        context.delegate.didReceiveChallenge(context.session,
+                                             {host, AuthenticationMethod::serverTrust, trust}, completion);
+    });
+    const std::lock_guard lock(answer->mutex);
+    answer->given = true;  // later calls are ignored
+    return answer->accepted;
+}
+
+// Asks the delegate on the queue and waits for its decision. Succeeds if it accepts: with a credential for
+// the given trust object, before it returns; only its first decision counts. Every other outcome is an error.
+Result<void> challengeDelegate(const ChallengeContext& context, const std::string& host,
+                               const std::vector<Data>& certificates) {
+    const std::shared_ptr<trust::Trust> trust = makeTrust(context.trust, host, certificates);
+    if (!trust)
+        return makeError(URLErrorCode::secureConnectionFailed,
+                         "The certificates sent by \"" + host + "\" could not be read.");
+    if (ask(context, host, trust)) return {};
+    return makeError(URLErrorCode::cancelled,
+                     "The connection to \"" + host + "\" was cancelled: the server is not trusted.");
+}
 
 class SessionTask;
 
@@ -177,20 +247,21 @@ class NetworkSession : public Session {
     }
 
     void carryOutDownload(SessionTask& task) {
-        std::optional<Error> error = download(task);
+        const Result<void> done = download(task);
+        const std::optional<Error> error = done ? std::nullopt : std::optional(done.error());
         callbacks_.sync([&] { delegate_.didComplete(*this, task, error); });
     }
 
     // The file is removed when this returns.
-    std::optional<Error> download(SessionTask& task) {
-        Result<std::unique_ptr<DownloadFile>> file = DownloadFile::create(temporaryDirectory());
+    Result<void> download(SessionTask& task) {
+        Result<std::unique_ptr<DownloadFile>> file = DownloadFile::make(temporaryDirectory());
         if (!file) return file.error();
         const Result<HTTPResponse> answer = fetch(task.request(), options_.maximumDownload, **file);
         if (!answer) return answer.error();
-        if (auto error = (*file)->finish()) return error;
+        if (auto finished = (*file)->finish(); !finished) return finished;
         task.setResponse(*answer);
         callbacks_.sync([&] { delegate_.didFinishDownloading(*this, task, (*file)->location()); });
-        return std::nullopt;
+        return {};
     }
 
     URL temporaryDirectory() const {
@@ -255,10 +326,6 @@ class NetworkSessionService : public SessionService {
 
 std::unique_ptr<SessionService> makeSessionService(trust::TrustService& trust, SessionOptions options) {
     return std::make_unique<NetworkSessionService>(trust, std::move(options));
-}
-
-std::unique_ptr<SessionService> makeSessionService(trust::TrustService& trust) {
-    return makeSessionService(trust, SessionOptions{});
 }
 
 }  // namespace pinwell::https

@@ -9,11 +9,13 @@
 // a session from its own queue.
 #pragma once
 
+#include <chrono>
 #include <functional>
 #include <map>
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
 
 #include "foundation/bytes.h"
 #include "foundation/description.h"
@@ -25,6 +27,7 @@ namespace pinwell::https {
 
 using foundation::Data;
 using foundation::Error;
+using foundation::Result;
 using foundation::URL;
 
 inline constexpr int kMaximumRedirects = 10;
@@ -69,8 +72,7 @@ struct Request {
     void addHeader(std::string_view name, std::string_view value);
 };
 
-/// The head of a response; after redirects, of the last one. Fields of one name are joined with ",
-/// ".
+/// The head of a response; after redirects, of the last one. Fields of one name are joined with ", ".
 struct HTTPResponse {
     URL url;
     int status = 0;
@@ -159,11 +161,78 @@ class SessionService {
 
     /// The delegate must outlive the session. A session has its own threads: the error is
     /// `resourceUnavailable` if the user or the container may not start them.
-    virtual foundation::Result<std::shared_ptr<Session>> ephemeralSession(SessionDelegate& delegate) = 0;
+    virtual Result<std::shared_ptr<Session>> ephemeralSession(SessionDelegate& delegate) = 0;
+};
+
+/// Longest files that are read. Real files have a few KiB.
+inline constexpr std::size_t kMaximumIdentityCertificates = std::size_t{256} * 1024;
+inline constexpr std::size_t kMaximumIdentityKey = std::size_t{64} * 1024;
+
+/// The identity of a session: a certificate and its private key, for servers that ask for one in the
+/// handshake. Immutable, shared. The key's memory is wiped with the last reference, if OpenSSL wipes freed
+/// memory (crypto/crypto.h).
+class ClientIdentity {
+  public:
+    /// Reads two PEM files: the certificate, optionally followed by its issuers', and its unencrypted private
+    /// key. The error names the file and its fault in one sentence.
+    static Result<std::shared_ptr<const ClientIdentity>> read(const std::string& certificatePath,
+                                                              const std::string& keyPath);
+
+    ClientIdentity();
+    ~ClientIdentity();
+    ClientIdentity(const ClientIdentity&) = delete;
+    ClientIdentity& operator=(const ClientIdentity&) = delete;
+
+    /// Makes the TLS context (an SSL_CTX) send it to a server that asks. A server is judged before it gets
+    /// anything. Returns false if the TLS library refuses it, for example because the key is too weak.
+    bool install(void* context) const noexcept;
+
+  private:
+    struct Parts;
+    std::unique_ptr<Parts> parts_;
+};
+
+using Clock = std::chrono::steady_clock;
+
+/// The limits of a session. The defaults are the product's; tests choose others.
+struct SessionOptions {
+    std::size_t maximumResponseBody = kMaximumResponseBody;
+    std::size_t maximumDownload = kMaximumDownload;
+
+    /// Both of one exchange, with its interim responses and trailers.
+    std::size_t maximumHeaderBytes = 128UL * 1024;
+    std::size_t maximumHeaderFields = 256;
+
+    /// How many bytes on the wire the server may send without a complete line of a head or a piece of a body.
+    /// The transfer library's memory is in proportion.
+    std::size_t maximumSilentBytes = 256UL * 1024;
+
+    int maximumRedirects = kMaximumRedirects;
+
+    /// The longest time without a byte sent or received. Name lookup, connection and handshake up to the
+    /// server's certificate count as one wait.
+    std::chrono::milliseconds idleLimit = std::chrono::seconds(kIdleTimeoutSeconds);
+    std::chrono::milliseconds pollInterval = std::chrono::seconds(1);  // how often the clock is read
+    std::function<Clock::time_point()> now = Clock::now;
+
+    /// Keeps the connection of an exchange for the session's next one to the same host and port. The server
+    /// is not judged again then.
+    bool keepsConnection = false;
+
+    /// The maximum time without an exchange, and in all.
+    std::chrono::seconds keepsIdleConnectionFor{60};
+    std::chrono::seconds keepsConnectionFor{300};
+
+    /// Sent to every server that the delegate has accepted and that asks for it. So do not follow redirects
+    /// with it. Null: none.
+    std::shared_ptr<const ClientIdentity> identity = nullptr;
+
+    /// The directory for downloads; if empty, the user's temporary directory.
+    std::function<URL()> temporaryDirectory = {};
 };
 
 /// Sessions over the network. The trust service must outlive them.
-std::unique_ptr<SessionService> makeSessionService(trust::TrustService& trust);
+std::unique_ptr<SessionService> makeSessionService(trust::TrustService& trust, SessionOptions options = {});
 
 }  // namespace pinwell::https
 

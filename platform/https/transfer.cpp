@@ -10,17 +10,11 @@
 #include "foundation/bytes.h"
 #include "foundation/handle.h"
 #include "foundation/value.h"
-#include "https/field_syntax.h"
-#include "https/redirect.h"
-#include "https/response_head.h"
-#include "https/server_trust.h"
+#include "https/http_message.h"
 #include "https/transfer_error.h"
-#include "https/transfer_target.h"
 
 namespace pinwell::https {
 namespace {
-
-using foundation::Result;
 
 using EasyHandle = foundation::Handle<CURL, curl_easy_cleanup>;
 using HeaderListHandle = foundation::Handle<curl_slist, curl_slist_free_all>;
@@ -268,9 +262,9 @@ class Exchange {
     }
 
     bool judge(const std::vector<Data>& certificates) {
-        std::optional<Error> refusal = context_.judge(target_.host, certificates);
+        const Result<void> accepted = context_.judge(target_.host, certificates);
         lastActivity_ = context_.options.now();  // the judge's time does not count as the server's
-        if (refusal && !failure_) failure_ = std::move(refusal);
+        if (!accepted && !failure_) failure_ = accepted.error();
         return !failure_;
     }
 
@@ -357,11 +351,9 @@ class Exchange {
         }
         received_ += bytes.size();
         if (isRedirect({*request_.url, head_.status(), head_.headers()})) return true;
-        if (auto error = sink_.write(foundation::asBytes(bytes))) {
-            if (!failure_) failure_ = std::move(error);
-            return false;
-        }
-        return true;
+        const Result<void> written = sink_.write(foundation::asBytes(bytes));
+        if (!written && !failure_) failure_ = written.error();
+        return written.has_value();
     }
 
     static int onProgress(void* self, curl_off_t, curl_off_t, curl_off_t, curl_off_t uploaded) noexcept {

@@ -5,17 +5,46 @@
 // cookies, no credentials, no cache.
 #pragma once
 
+#include <sys/eventfd.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <cerrno>
+#include <cstdint>
 #include <functional>
 #include <optional>
 #include <string>
+#include <system_error>
 #include <vector>
 
+#include "foundation/file_io.h"
 #include "https/body_sink.h"
-#include "https/connection_slot.h"
-#include "https/interrupt.h"
-#include "https/session_options.h"
+#include "https/connection.h"
 
 namespace pinwell::https {
+
+/// A flag that one thread raises, and for which another can wait together with its sockets.
+class Interrupt {
+  public:
+    Interrupt() : event_(::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
+        if (!event_) throw std::system_error(errno, std::generic_category(), "eventfd");
+    }
+
+    void raise() noexcept {
+        raised_ = true;
+        const std::uint64_t one = 1;
+        // Fails only if the counter is full; then the descriptor is already readable.
+        [[maybe_unused]] const ssize_t ignored = ::write(event_.get(), &one, sizeof one);
+    }
+    bool isRaised() const noexcept { return raised_; }
+
+    /// Readable after it was raised.
+    int descriptor() const noexcept { return event_.get(); }
+
+  private:
+    foundation::FileDescriptor event_;
+    std::atomic<bool> raised_ = false;
+};
 
 struct TransferContext {
     const SessionOptions& options;
@@ -23,9 +52,8 @@ struct TransferContext {
     const Interrupt& interrupt;  // ends the exchange with `cancelled`
     std::size_t maximumBody;
 
-    /// Judges the server of that host by its certificates, the leaf first: returns `nullopt`, or why it is
-    /// refused.
-    std::function<std::optional<Error>(const std::string& host, const std::vector<Data>& certificates)> judge;
+    /// Judges the server of that host by its certificates, the leaf first; the error is why it is refused.
+    std::function<Result<void>(const std::string& host, const std::vector<Data>& certificates)> judge;
 };
 
 struct TransferAnswer {
@@ -36,7 +64,6 @@ struct TransferAnswer {
 /// Blocks until the response is complete or has failed. The body of a redirect is dropped; any other goes to
 /// `sink`. A URL that is not https, or that names a user, is refused before anything is sent. The calling
 /// thread must have SIGPIPE blocked.
-foundation::Result<TransferAnswer> transfer(const Request& request, const TransferContext& context,
-                                            BodySink& sink);
+Result<TransferAnswer> transfer(const Request& request, const TransferContext& context, BodySink& sink);
 
 }  // namespace pinwell::https

@@ -1,5 +1,5 @@
 // The identity of a session.
-#include "https/client_identity.h"
+#include "https/session.h"
 
 #include <openssl/bio.h>
 #include <openssl/pem.h>

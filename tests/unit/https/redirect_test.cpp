@@ -1,5 +1,5 @@
 // The redirects that are followed, and the next request.
-#include "https/redirect.h"
+#include "https/http_message.h"
 
 #include "session_fixture.h"
 

@@ -1,6 +1,6 @@
 // The head of a response, line by line: accepted lines, and lines that are refused even if the transfer
 // library accepts them.
-#include "https/response_head.h"
+#include "https/http_message.h"
 
 #include <gtest/gtest.h>
 

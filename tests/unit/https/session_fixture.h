@@ -10,7 +10,7 @@
 
 #include "foundation/bytes.h"
 #include "foundation/url.h"
-#include "https/session_options.h"
+#include "https/session.h"
 #include "support/certificate_builder.h"
 #include "support/fake_trust_service.h"
 #include "support/hostile_server.h"

@@ -1,19 +1,38 @@
-#include "https/server_trust.h"
+#include "https/connection.h"
 
+#include <curl/curl.h>
 #include <openssl/ssl.h>
 #include <openssl/x509.h>
 #include <openssl/x509_vfy.h>
+#include <poll.h>
 
 #include <algorithm>
 #include <array>
 #include <exception>
-#include <memory>
 #include <optional>
+#include <span>
+#include <string_view>
+#include <utility>
+
+#include "foundation/handle.h"
+#include "https/transfer_error.h"
 
 namespace pinwell::https {
 namespace {
 
-using foundation::Data;
+std::string partOf(CURLU* address, CURLUPart part, unsigned flags) {
+    char* text = nullptr;
+    if (curl_url_get(address, part, &text, flags) != CURLUE_OK) return {};
+    const foundation::Handle<char, curl_free> owner(text);
+    return text;
+}
+
+// In the authority, which ends where the path, query or fragment begins (RFC 3986, section 3.2).
+bool namesUser(std::string_view text) {
+    constexpr std::string_view kMark = "://";
+    text.remove_prefix(std::min(text.find(kMark), text.size() - kMark.size()) + kMark.size());
+    return text.substr(0, text.find_first_of("/?#")).find('@') != std::string_view::npos;
+}
 
 struct OpenSSLFree {
     void operator()(unsigned char* bytes) const noexcept { OPENSSL_free(bytes); }
@@ -93,6 +112,35 @@ int sharePlace() {
 
 }  // namespace
 
+void AddressDeleter::operator()(Curl_URL* address) const noexcept {
+    curl_url_cleanup(address);
+}
+
+Result<Target> targetOf(const foundation::URL& url) {
+    const std::string text = url.absoluteString();
+    const auto refuse = [&text](std::string_view why) {
+        return makeError(URLErrorCode::unsupportedURL, "The URL \"" + text + "\" " + std::string(why) + ".");
+    };
+    if (url.scheme() != "https") return refuse("is not an https URL");
+    if (namesUser(text))  // its text would show the password
+        return makeError(URLErrorCode::unsupportedURL,
+                         "The URL for \"" + url.host() + "\" holds a user name, which is not supported.");
+    Target target{AddressHandle(curl_url()), {}, {}};
+    const CURLUcode code =
+        curl_url_set(target.address.get(), CURLUPART_URL, text.c_str(), CURLU_DISALLOW_USER);
+    if (code != CURLUE_OK) return refuse("is malformed");
+    target.host = partOf(target.address.get(), CURLUPART_HOST, 0);
+    target.port = partOf(target.address.get(), CURLUPART_PORT, CURLU_DEFAULT_PORT);
+    if (target.host.starts_with('[') && target.host.ends_with(']'))
+        target.host = target.host.substr(1, target.host.size() - 2);
+    // The judged name must be the name of the connection, in any spelling.
+    const CaseInsensitiveLess less;
+    if (less(target.host, url.host()) || less(url.host(), target.host))
+        return refuse("has an ambiguous host");
+    target.host = url.host();
+    return target;
+}
+
 std::shared_ptr<ServerTrust> ServerTrust::install(void* context, Judge judge) noexcept {
     auto* const tls = static_cast<SSL_CTX*>(context);
     std::shared_ptr<ServerTrust> trust;
@@ -146,6 +194,59 @@ bool ServerTrust::verify(void* storeContext) noexcept {
     refused_ = refused_ || !trusted;
     X509_STORE_CTX_set_error(context, trusted ? X509_V_OK : X509_V_ERR_APPLICATION_VERIFICATION);
     return trusted;
+}
+
+void ConnectionSlot::HandleDeleter::operator()(void* handle) const noexcept {
+    curl_multi_cleanup(handle);
+}
+
+ConnectionSlot::ConnectionSlot() = default;
+ConnectionSlot::~ConnectionSlot() = default;
+
+void* ConnectionSlot::handleFor(const Target& target) {
+    if (!handle_ || target.host != host_ || target.port != port_ || !isQuiet()) drop();
+    if (!handle_) {
+        handle_.reset(curl_multi_init());
+        host_ = target.host;
+        port_ = target.port;
+        if (handle_ && curl_multi_setopt(handle_.get(), CURLMOPT_MAXCONNECTS, 1L) != CURLM_OK) drop();
+    }
+    socket_ = -1;
+    return handle_.get();
+}
+
+// Between two exchanges of HTTP/1 a server must not send anything. Readable bytes are its end, or would be
+// read as the next response. HTTP/2 numbers its responses, and the library checks for its end itself.
+bool ConnectionSlot::isQuiet() const noexcept {
+    if (socket_ < 0 || !trust_) return false;
+    if (trust_->agreedOnHTTP2()) return true;
+    pollfd connection{socket_, POLLIN, 0};
+    return ::poll(&connection, 1, 0) == 0;
+}
+
+bool ConnectionSlot::prepare(void* tlsContext, ServerTrust::Judge judge) noexcept {
+    localPort_ = 0;
+    trust_ = ServerTrust::install(tlsContext, std::move(judge));
+    return trust_ != nullptr;
+}
+
+bool ConnectionSlot::confirm(int localPort) noexcept {
+    if (!trust_ || !trust_->accepted()) return false;
+    if (localPort_ == 0) localPort_ = localPort;
+    return localPort_ == localPort;
+}
+
+void ConnectionSlot::keep(int socket) noexcept {
+    if (trust_) trust_->forgetJudge();
+    socket_ = socket;
+    if (socket_ < 0) drop();
+}
+
+void ConnectionSlot::drop() noexcept {
+    handle_.reset();
+    trust_.reset();
+    localPort_ = 0;
+    socket_ = -1;
 }
 
 }  // namespace pinwell::https

@@ -1,8 +1,4 @@
-// Collects the head of a response from its lines, one exchange at a time.
-//
-// The transfer library reads the same lines, by rules that differ between its releases. So lines that it
-// could read in another way are refused here: a status line of another form, a name that is not a token (a
-// space before the colon), a folded field that defines the body's end, a NUL.
+// The parts of HTTP messages: the syntax of fields, the head of a response, and redirects.
 #pragma once
 
 #include <cstdint>
@@ -11,9 +7,30 @@
 
 namespace pinwell::https {
 
+/// A method or a field's name (RFC 9110, section 5.6.2).
+bool isToken(std::string_view text) noexcept;
+
+/// A field's value as we send it: no control character except the tab.
+bool isFieldValue(std::string_view text) noexcept;
+
+/// Whether it is a 3xx response with a Location. Without one it is a response like any other.
+bool isRedirect(const HTTPResponse& response);
+
+/// The next request. `target` is the Location, resolved against the URL of `request`. 301, 302 and 303 turn a
+/// POST into a GET (303 any method except HEAD) and drop the body with the fields that describe it; 307 and
+/// 308 keep all. Fields with secrets are not sent to another host. Any other redirect, and a target that is
+/// not https, is an error.
+Result<Request> requestAfterRedirect(const Request& request, int status, const std::string& target);
+
 /// Longest line of a head, with its end. The transfer library's own limit is 100 KiB.
 inline constexpr std::size_t kMaximumHeaderLine = 64UL * 1024;
 
+/// Collects the head of a response from its lines, one exchange at a time.
+///
+/// The transfer library reads the same lines, by rules that differ between its releases. So lines that it
+/// could read in another way are refused here: a status line of another form, a name that is not a token (a
+/// space before the colon), a folded field that defines the body's end, a NUL.
+///
 /// Interim responses (1xx) are dropped at the next status line. A status line may only be the first line of a
 /// head. Fields after the body (trailers) are counted and dropped. Fields of one name are joined with ", " in
 /// their order (RFC 9110, section 5.3).

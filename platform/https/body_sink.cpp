@@ -1,4 +1,4 @@
-#include "https/download_file.h"
+#include "https/body_sink.h"
 
 #include <fcntl.h>
 #include <unistd.h>
@@ -8,7 +8,6 @@
 #include <mutex>
 #include <set>
 
-#include "foundation/bytes.h"
 #include "foundation/value.h"
 #include "https/transfer_error.h"
 
@@ -57,7 +56,7 @@ class Leftovers {
 
 }  // namespace
 
-foundation::Result<std::unique_ptr<DownloadFile>> DownloadFile::create(const URL& directory) {
+Result<std::unique_ptr<DownloadFile>> DownloadFile::make(const URL& directory) {
     std::string path = directory.appendingPathComponent("pinwell-download-XXXXXX").path();
     foundation::FileDescriptor file(::mkostemp(path.data(), O_CLOEXEC));  // it adds O_EXCL and 0600
     if (!file) return writeError(errno, path);
@@ -77,19 +76,19 @@ Error DownloadFile::failure(int number) const {
     return writeError(number, path_);
 }
 
-std::optional<Error> DownloadFile::write(foundation::ByteView bytes) {
+Result<void> DownloadFile::write(foundation::ByteView bytes) {
     while (!bytes.empty()) {
         const ssize_t count = ::write(file_.get(), bytes.data(), bytes.size());
         if (count < 0 && errno == EINTR) continue;
         if (count < 0) return failure(errno);
         bytes = bytes.subspan(static_cast<std::size_t>(count));
     }
-    return std::nullopt;
+    return {};
 }
 
-std::optional<Error> DownloadFile::finish() {
+Result<void> DownloadFile::finish() {
     if (::close(file_.release()) != 0 && errno != EINTR) return failure(errno);
-    return std::nullopt;
+    return {};
 }
 
 }  // namespace pinwell::https
