@@ -4,9 +4,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
-#include <cstdio>
-#include <system_error>
 #include <utility>
 
 namespace pinwell::files {
@@ -33,35 +30,8 @@ Result<OpenFile> createFile(const Place& place, mode_t mode) {
     return file;
 }
 
-Result<OpenFile> createTemporaryFileBeside(const Place& place) {
-    const std::string directory = directoryOf(place.path);
-    auto file = underFreshName(".pinwell-", [&](const std::string& name) {
-        return createFile({place.parent, name, directory + "/" + name});
-    });
-    if (!file) return Error::posix(static_cast<int>(file.error().code()), directory);
-    return file;
-}
-
-std::string freshName(std::string_view prefix) {
-    constexpr std::string_view kLetters = "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789";
-    std::array<unsigned char, kRandomLetters> random{};
-    if (getentropy(random.data(), random.size()) != 0)
-        throw std::system_error(errno, std::generic_category(), "getentropy");
-    std::string name(prefix);
-    // The distribution is not uniform and need not be: the name must be hard to guess, not secret.
-    for (const unsigned char byte : random) name += kLetters[byte % kLetters.size()];
-    return name;
-}
-
 Result<FileDescriptor> openDirectory(const Place& place) {
     return place.open(O_RDONLY | O_DIRECTORY);
-}
-
-Result<void> renameItem(const Place& from, const Place& to) {
-    const int done = uninterrupted(
-        [&] { return renameat(from.directory(), from.name.c_str(), to.directory(), to.name.c_str()); });
-    if (done != 0) return lastError(to.path);
-    return {};
 }
 
 Result<void> writeAll(const OpenFile& file, ByteView bytes) {

@@ -8,7 +8,6 @@
 #include <cerrno>
 #include <optional>
 #include <string>
-#include <string_view>
 #include <utility>
 
 #include "files/file_manager.h"
@@ -64,28 +63,8 @@ Result<OpenFile> openRegularFile(const Place& place, int flags, mode_t mode = kP
 /// Creates and opens a file for writing; `place` must not exist yet.
 Result<OpenFile> createFile(const Place& place, mode_t mode = kPrivateFile);
 
-/// Creates and opens a hidden file of mode 0600 with a free name, for writing, beside the item at `place`.
-Result<OpenFile> createTemporaryFileBeside(const Place& place);
-
-/// An unguessable name: `prefix` and kRandomLetters letters and digits.
-inline constexpr std::size_t kRandomLetters = 6;
-std::string freshName(std::string_view prefix);
-
-/// The result of `make` for the first fresh name that is free: for a used name its error is EEXIST.
-template <class Make>
-auto underFreshName(std::string_view prefix, Make make) {
-    constexpr int kMaximumTries = 100;  // the 62^6 names of one prefix are never that full
-    auto made = make(freshName(prefix));
-    for (int tries = 1; tries < kMaximumTries && !made && made.error().code() == EEXIST; ++tries)
-        made = make(freshName(prefix));
-    return made;
-}
-
 /// Opens the directory itself, without following a link.
 Result<FileDescriptor> openDirectory(const Place& place);
-
-/// One rename; errors name the new place.
-Result<void> renameItem(const Place& from, const Place& to);
 
 Result<void> writeAll(const OpenFile& file, ByteView bytes);
 

@@ -2,13 +2,58 @@
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <array>
+#include <cstdio>
 #include <string_view>
+#include <system_error>
 #include <utility>
 
 #include "files/operations.h"
 
 namespace pinwell::files {
 namespace {
+
+constexpr std::size_t kRandomLetters = 6;
+
+// An unguessable name: `prefix` and kRandomLetters letters and digits.
+std::string freshName(std::string_view prefix) {
+    constexpr std::string_view kLetters = "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789";
+    std::array<unsigned char, kRandomLetters> random{};
+    if (getentropy(random.data(), random.size()) != 0)
+        throw std::system_error(errno, std::generic_category(), "getentropy");
+    std::string name(prefix);
+    // The distribution is not uniform and need not be: the name must be hard to guess, not secret.
+    for (const unsigned char byte : random) name += kLetters[byte % kLetters.size()];
+    return name;
+}
+
+// The result of `make` for the first fresh name that is free: for a used name its error is EEXIST.
+template <class Make>
+auto underFreshName(std::string_view prefix, Make make) {
+    constexpr int kMaximumTries = 100;  // the 62^6 names of one prefix are never that full
+    auto made = make(freshName(prefix));
+    for (int tries = 1; tries < kMaximumTries && !made && made.error().code() == EEXIST; ++tries)
+        made = make(freshName(prefix));
+    return made;
+}
+
+// Creates and opens a hidden file of mode 0600 with a free name, for writing, beside the item at `place`.
+Result<OpenFile> createTemporaryFileBeside(const Place& place) {
+    const std::string directory = directoryOf(place.path);
+    auto file = underFreshName(".pinwell-", [&](const std::string& name) {
+        return createFile({place.parent, name, directory + "/" + name});
+    });
+    if (!file) return Error::posix(static_cast<int>(file.error().code()), directory);
+    return file;
+}
+
+// One rename; errors name the new place.
+Result<void> renameItem(const Place& from, const Place& to) {
+    const int done = uninterrupted(
+        [&] { return renameat(from.directory(), from.name.c_str(), to.directory(), to.name.c_str()); });
+    if (done != 0) return lastError(to.path);
+    return {};
+}
 
 Result<void> makePrivate(const OpenFile& file) {
     if (uninterrupted([&] { return fchmod(file.number(), S_IRUSR | S_IWUSR); }) != 0)

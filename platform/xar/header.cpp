@@ -65,7 +65,7 @@ constexpr std::array<Known, 7> kKnown{{
     {DigestAlgorithm::sha224, "sha224", 28},
     {DigestAlgorithm::sha256, "sha256", 32},
     {DigestAlgorithm::sha384, "sha384", 48},
-    {DigestAlgorithm::sha512, "sha512", kLongestDigest},
+    {DigestAlgorithm::sha512, "sha512", 64},
 }};
 
 const EVP_MD* implementation(DigestAlgorithm algorithm) {

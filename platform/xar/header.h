@@ -34,9 +34,6 @@ std::optional<DigestAlgorithm> digestAlgorithmNamed(std::string_view name);
 /// In bytes; 0 for none.
 std::size_t digestSize(DigestAlgorithm algorithm);
 
-/// No digest is longer.
-inline constexpr std::size_t kLongestDigest = 64;
-
 /// A digest over several pieces of bytes.
 class Digest {
   public:
