@@ -17,11 +17,10 @@ namespace {
 Data computedChecksum(ByteView archive) {
     const auto header = xar::parseHeader(archive.first(std::min(archive.size(), xar::kLongestHeaderRead)));
     require(header.has_value(), "an archive has a header");
-    xar::Digest digest(header->algorithm);
+    if (!header->digest) return {};
     foundation::ByteReader reader(archive);
     reader.skip(header->size, "header");
-    digest.update(reader.bytes(header->compressedLength, "table of contents"));
-    return digest.finish();
+    return crypto::digestOf(*header->digest, reader.bytes(header->compressedLength, "table of contents"));
 }
 
 void examineSignature(xar_signature_t signature, const Data& checksum) {

@@ -55,26 +55,6 @@ std::optional<Data> bytesFrom(std::string_view text) {
     return bytes;
 }
 
-std::optional<Algorithm> algorithmNamed(std::string_view style) {
-    switch (xar::digestAlgorithmNamed(style).value_or(xar::DigestAlgorithm::none)) {
-        case xar::DigestAlgorithm::md5:
-            return Algorithm::md5;
-        case xar::DigestAlgorithm::sha1:
-            return Algorithm::sha1;
-        case xar::DigestAlgorithm::sha224:
-            return Algorithm::sha224;
-        case xar::DigestAlgorithm::sha256:
-            return Algorithm::sha256;
-        case xar::DigestAlgorithm::sha384:
-            return Algorithm::sha384;
-        case xar::DigestAlgorithm::sha512:
-            return Algorithm::sha512;
-        case xar::DigestAlgorithm::none:
-            break;
-    }
-    return std::nullopt;
-}
-
 /// The fields of an element with a place in the heap. A repeated field makes it ambiguous.
 struct Described {
     std::optional<std::uint64_t> offset;
@@ -163,7 +143,7 @@ class ArchiveTableReader::Document final : public foundation::XMLEvents {
                 style_ = attributes["style"].value_or("");
                 break;
             case Place::archivedChecksum:
-                described_.set(described_.algorithm, algorithmNamed(attributes["style"].value_or("")));
+                described_.set(described_.algorithm, xar::digestNamed(attributes["style"].value_or("")));
                 break;
             default:
                 break;
@@ -336,13 +316,14 @@ Archive readArchive(const ByteSource& source, std::uint64_t end) {
         reader.feed(bytes);
         return true;
     });
-    xar::Digest digest(header->algorithm);
+    std::optional<crypto::Hasher> hasher;
+    if (header->digest) hasher.emplace(*header->digest);
     Archive archive;
     archive.heapStart = header->size + header->compressedLength;
     for (std::uint64_t at = header->size; at < archive.heapStart;) {
         const Data piece = source.read(
             at, static_cast<std::size_t>(std::min<std::uint64_t>(kTablePieceSize, archive.heapStart - at)));
-        digest.update(piece);
+        if (hasher) hasher->update(piece);
         if (!inflater.feed(piece)) refuse("the table of contents cannot be decompressed");
         at += piece.size();
     }
@@ -352,8 +333,8 @@ Archive readArchive(const ByteSource& source, std::uint64_t end) {
     if (stated.be64("uncompressed length") != length)
         refuse("the header states another length of the table of contents");
     archive.table = reader.finish();
-    archive.algorithm = header->algorithm;
-    archive.computed = digest.finish();
+    archive.algorithm = header->digest;
+    if (hasher) archive.computed = foundation::toData(hasher->finish());
     return archive;
 }
 

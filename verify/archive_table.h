@@ -93,7 +93,7 @@ class ArchiveTableReader {
 struct Archive {
     std::uint64_t heapStart = 0;
     ArchiveTable table;
-    xar::DigestAlgorithm algorithm = xar::DigestAlgorithm::none;
+    std::optional<Algorithm> algorithm;
     Data computed;  // checksum of the table
 };
 

@@ -164,9 +164,8 @@ class PackageCheck {
         constexpr const char* kPlace = "table of contents";
         const auto range =
             archive_.table.checksum ? inFile(archive_, *archive_.table.checksum, end_) : std::nullopt;
-        if (archive_.algorithm == xar::DigestAlgorithm::none || !range ||
-            range->length != xar::digestSize(archive_.algorithm) ||
-            xar::digestAlgorithmNamed(archive_.table.checksumStyle) != archive_.algorithm) {
+        if (!archive_.algorithm || !range || range->length != crypto::digestSize(*archive_.algorithm) ||
+            xar::digestNamed(archive_.table.checksumStyle) != archive_.algorithm) {
             section_.fail(kTableChecksum, kPlace, "a checksum of the header's kind", "none");
             return;
         }

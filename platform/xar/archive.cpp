@@ -32,6 +32,7 @@ constexpr std::size_t kDigestedAtOnce = std::size_t{64} * 1024;
 
 constexpr std::string_view kOffsetPath = "checksum/offset";
 constexpr std::string_view kSizePath = "checksum/size";
+constexpr std::string_view kNoChecksumStyle = "none";
 
 template <class Call>
 auto uninterrupted(Call call) {
@@ -75,7 +76,7 @@ class Archive {
     bool openFile(const std::string& path);
     std::optional<foundation::Data> read(std::uint64_t offset, std::size_t length) const;
     bool readTable(const Header& header);
-    bool isChecksumDescribed(DigestAlgorithm algorithm) const;
+    bool isChecksumDescribed(std::optional<Digest> digest) const;
     bool isChecksumStored() const;
 
     foundation::FileDescriptor file_;
@@ -91,9 +92,9 @@ std::unique_ptr<Archive> Archive::open(const std::string& path) {
     const auto start = archive->read(
         0, static_cast<std::size_t>(std::min<std::uint64_t>(kLongestHeaderRead, archive->fileSize_)));
     const auto header = start ? parseHeader(*start) : std::nullopt;
-    if (!header || !archive->readTable(*header) || !archive->isChecksumDescribed(header->algorithm))
+    if (!header || !archive->readTable(*header) || !archive->isChecksumDescribed(header->digest))
         return nullptr;
-    if (header->algorithm != DigestAlgorithm::none && !archive->isChecksumStored()) return nullptr;
+    if (header->digest && !archive->isChecksumStored()) return nullptr;
     return archive;
 }
 
@@ -127,31 +128,34 @@ bool Archive::readTable(const Header& header) {
     TableOfContentsReader reader;
     Inflater inflater(kMaximumTableOfContents,
                       [&](foundation::ByteView bytes) { return reader.feed(bytes); });
-    Digest digest(header.algorithm);
+    std::optional<crypto::Hasher> hasher;
+    if (header.digest) hasher.emplace(*header.digest);
     std::uint64_t at = header.size;
     std::uint64_t rest = header.compressedLength;
     while (rest > 0) {
         const auto piece = read(at, static_cast<std::size_t>(std::min<std::uint64_t>(rest, kDigestedAtOnce)));
         if (!piece || !inflater.feed(*piece)) return false;
-        digest.update(*piece);
+        if (hasher) hasher->update(*piece);
         at += piece->size();
         rest -= piece->size();
     }
     auto table = inflater.complete() ? reader.finish() : std::nullopt;
     if (!table) return false;
     table_ = *std::move(table);
-    checksum_ = digest.finish();
+    if (hasher) checksum_ = foundation::toData(hasher->finish());
     heapStart_ = at;
     return true;
 }
 
 // Whether the table describes the header's checksum, and no other.
-bool Archive::isChecksumDescribed(DigestAlgorithm algorithm) const {
+bool Archive::isChecksumDescribed(std::optional<Digest> digest) const {
     const bool isSigned = !table_.signatures.empty();
-    if (algorithm == DigestAlgorithm::none && isSigned) return false;
+    if (!digest && isSigned) return false;
     const bool hasElement = table_.properties.find("checksum") != table_.properties.end();
-    if (!hasElement && algorithm == DigestAlgorithm::none) return true;
-    if (!table_.checksumStyle || digestAlgorithmNamed(*table_.checksumStyle) != algorithm) return false;
+    if (!hasElement && !digest) return true;
+    if (!table_.checksumStyle) return false;
+    if (digest ? digestNamed(*table_.checksumStyle) != digest : *table_.checksumStyle != kNoChecksumStyle)
+        return false;
     // Otherwise a signature would sign bytes without a stated place.
     const bool isPlaced = table_.properties.find(kOffsetPath) != table_.properties.end() &&
                           table_.properties.find(kSizePath) != table_.properties.end();

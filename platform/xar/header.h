@@ -1,4 +1,4 @@
-// The fixed part of an archive, and the digests that it can name.
+// The fixed part of an archive.
 //
 // | Offset    | Size | Field                                                     |
 // |-----------|------|-----------------------------------------------------------|
@@ -17,41 +17,19 @@
 #pragma once
 
 #include <cstdint>
-#include <memory>
 #include <optional>
 #include <string_view>
 
+#include "crypto/crypto.h"
 #include "foundation/bytes.h"
 
 namespace pinwell::xar {
 
-enum class DigestAlgorithm { none, md5, sha1, sha224, sha256, sha384, sha512 };
+using Digest = crypto::Digest;
 
-/// The algorithm by its name in lower case, also "none". Returns `nullopt` for any other spelling: otherwise
-/// readers that compare case would differ from readers that do not.
-std::optional<DigestAlgorithm> digestAlgorithmNamed(std::string_view name);
-
-/// In bytes; 0 for none.
-std::size_t digestSize(DigestAlgorithm algorithm);
-
-/// A digest over several pieces of bytes.
-class Digest {
-  public:
-    /// Throws std::bad_alloc if the algorithm is not available (no memory, or local policy).
-    explicit Digest(DigestAlgorithm algorithm);
-    ~Digest();
-    Digest(const Digest&) = delete;
-    Digest& operator=(const Digest&) = delete;
-
-    void update(foundation::ByteView bytes);
-
-    /// Call it once, and last. Empty for `none`.
-    foundation::Data finish();
-
-  private:
-    struct Context;
-    std::unique_ptr<Context> context_;  // null for none
-};
+/// The digest by its name in lower case. Returns `nullopt` for any other spelling: otherwise readers that
+/// compare case would differ from readers that do not.
+std::optional<Digest> digestNamed(std::string_view name);
 
 /// The length of the fields that every header has.
 inline constexpr std::size_t kFixedHeaderSize = 28;
@@ -62,7 +40,7 @@ inline constexpr std::size_t kLongestHeaderRead = kFixedHeaderSize + 64;
 struct Header {
     std::uint16_t size = 0;
     std::uint64_t compressedLength = 0;
-    DigestAlgorithm algorithm = DigestAlgorithm::none;
+    std::optional<Digest> digest;  // of the checksum; `nullopt`: there is none
 };
 
 /// The header at the start of `bytes`, which are at most the file's first kLongestHeaderRead bytes. Returns
