@@ -4,6 +4,7 @@
 #include <openssl/ssl.h>
 #include <openssl/x509.h>
 
+#include "crypto/openssl.h"
 #include "foundation/format.h"
 #include "foundation/handle.h"
 #include "foundation/secret_file.h"
@@ -21,14 +22,6 @@ struct FreeList {
     void operator()(STACK_OF(X509) * list) const noexcept { sk_X509_pop_free(list, X509_free); }
 };
 using ListHandle = std::unique_ptr<STACK_OF(X509), FreeList>;
-
-// Our own words describe OpenSSL's errors about the files; nothing stays in the thread's queue.
-struct QuietErrors {
-    QuietErrors() { ERR_set_mark(); }
-    ~QuietErrors() { ERR_pop_to_mark(); }
-    QuietErrors(const QuietErrors&) = delete;
-    QuietErrors& operator=(const QuietErrors&) = delete;
-};
 
 Error wrongFile(std::string text) {
     return {foundation::kDataErrorDomain, foundation::kMalformedDocument, std::move(text)};
@@ -94,7 +87,7 @@ ClientIdentity::~ClientIdentity() = default;
 
 Result<std::shared_ptr<const ClientIdentity>> ClientIdentity::read(const std::string& certificatePath,
                                                                    const std::string& keyPath) {
-    const QuietErrors quiet;
+    const crypto::ErrorQueueGuard quiet;  // our own words describe the errors
     auto certificates = readCertificates(certificatePath);
     if (!certificates) return certificates.error();
     auto key = readKey(keyPath);
@@ -113,7 +106,7 @@ Result<std::shared_ptr<const ClientIdentity>> ClientIdentity::read(const std::st
 }
 
 bool ClientIdentity::install(void* context) const noexcept {
-    const QuietErrors quiet;
+    const crypto::ErrorQueueGuard quiet;  // our own words describe the errors
     return SSL_CTX_use_cert_and_key(static_cast<SSL_CTX*>(context), parts_->certificates.own.get(),
                                     parts_->key.get(), parts_->certificates.issuers.get(), 1) == 1;
 }
