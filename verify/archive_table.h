@@ -24,7 +24,6 @@
 #include "codesign/byte_source.h"
 #include "codesign/executable_image.h"
 #include "verify/page_digest.h"
-#include "xar/header.h"
 
 namespace pinwell::verify {
 
