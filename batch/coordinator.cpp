@@ -56,7 +56,7 @@ struct Coordinator::Item {
     unsigned failures = 0;  // lookups without a result
     unsigned polls = 0;     // lookups whose result was: no ticket yet
     std::optional<Clock::time_point> notIssuedSince;
-    std::optional<foundation::Error> lastError;
+    std::optional<base::Error> lastError;
 };
 
 // Lookups in progress: groups of items at the record service, each on its own thread.
@@ -94,7 +94,7 @@ class Coordinator::Lookups {
 };
 
 Coordinator::Coordinator(const Settings& settings, const Platform& platform, companion::PathList& paths,
-                         const foundation::FileDescriptor& signals, Events events)
+                         const base::FileDescriptor& signals, Events events)
     : settings_(settings),
       platform_(platform),
       paths_(paths),
@@ -394,7 +394,7 @@ void Coordinator::end(const ItemRef& item, const Outcome& outcome) {
     report.messages = item->run->messages();
     const bool wasCutShort = outcome.cause == Cause::timedOut || outcome.cause == Cause::interrupted;
     if (wasCutShort && item->lastError)
-        report.messages.push_back(foundation::format("error is %@", item->lastError));
+        report.messages.push_back(values::format("error is %@", item->lastError));
     const std::string filesState = item->run->filesState();
     item->run.reset();
     item->answer = {};

@@ -51,7 +51,7 @@ class Coordinator {
 
     /// `signals` is readable after a signal that ends the run (signalfd(2)).
     Coordinator(const Settings& settings, const Platform& platform, companion::PathList& paths,
-                const foundation::FileDescriptor& signals, Events events);
+                const base::FileDescriptor& signals, Events events);
     ~Coordinator();
     Coordinator(const Coordinator&) = delete;
     Coordinator& operator=(const Coordinator&) = delete;
@@ -63,7 +63,7 @@ class Coordinator {
     bool hasSeenPaths() const noexcept { return hasSeenPaths_; }
 
     /// The error that stopped reading the list.
-    const std::optional<foundation::Error>& listError() const noexcept { return paths_.error(); }
+    const std::optional<base::Error>& listError() const noexcept { return paths_.error(); }
 
   private:
     struct Item;    // an artefact in progress
@@ -106,7 +106,7 @@ class Coordinator {
     const Settings& settings_;
     const Platform platform_;
     companion::PathList& paths_;
-    const foundation::FileDescriptor& signals_;
+    const base::FileDescriptor& signals_;
     const Events events_;
     const std::optional<Clock::time_point> deadline_;
 

@@ -8,16 +8,16 @@
 #include <cerrno>
 #include <utility>
 
+#include "base/file_io.h"
 #include "batch/report.h"
-#include "foundation/file_io.h"
-#include "foundation/format.h"
 #include "src/DownloadDelegate.h"
+#include "values/format.h"
 
 namespace pinwell::batch {
 namespace {
 
-using foundation::Error;
-using foundation::Result;
+using base::Error;
+using base::Result;
 using retrieval::Cause;
 
 constexpr std::string_view kFirstLine = "pinwell-batch journal 1\n";
@@ -66,10 +66,9 @@ std::optional<std::array<std::string_view, kFields>> fieldsOf(std::string_view l
 
 Result<Journal> Journal::open(const std::string& path) {
     constexpr mode_t kMode = 0666;  // without the bits of the user's mask
-    auto file = foundation::openRegularFile(path, O_RDWR | O_APPEND | O_CREAT, kMode);
+    auto file = base::openRegularFile(path, O_RDWR | O_APPEND | O_CREAT, kMode);
     if (!file && file.error().code() == EINVAL)
-        return Error(foundation::kDataErrorDomain, foundation::kMalformedDocument,
-                     path + " is not a regular file.");
+        return Error(base::kDataErrorDomain, base::kMalformedDocument, path + " is not a regular file.");
     if (!file) return file.error();
     Journal journal(path, std::move(file->descriptor));
     if (const auto done = journal.read(); !done) return done.error();
@@ -93,7 +92,7 @@ Result<void> Journal::read() {
             if (end == std::string_view::npos) break;
             rest.remove_prefix(end + 1);
             if (isFirst && line + "\n" != kFirstLine)
-                return Error(foundation::kDataErrorDomain, foundation::kMalformedDocument,
+                return Error(base::kDataErrorDomain, base::kMalformedDocument,
                              path_ + " is not a journal of pinwell-batch.");
             if (!isFirst && !isTooLong) readLine(line);
             isFirst = false;
@@ -102,7 +101,7 @@ Result<void> Journal::read() {
         }
     }
     if (isFirst && !kFirstLine.starts_with(line))
-        return Error(foundation::kDataErrorDomain, foundation::kMalformedDocument,
+        return Error(base::kDataErrorDomain, base::kMalformedDocument,
                      path_ + " is not a journal of pinwell-batch.");
     if (isFirst) return append(kFirstLine.substr(line.size()));
     // Ends a partial line of a killed run, which is then a malformed line.

@@ -22,9 +22,9 @@
 #include <string_view>
 #include <unordered_map>
 
+#include "base/error.h"
+#include "base/handle.h"
 #include "batch/selection.h"
-#include "foundation/error.h"
-#include "foundation/file_io.h"
 #include "retrieval/report.h"
 
 namespace pinwell::batch {
@@ -42,29 +42,28 @@ class Journal {
   public:
     /// Reads the file, or creates it. Returns an error that names the file, also if it is not a journal; such
     /// a file is not changed.
-    static foundation::Result<Journal> open(const std::string& path);
+    static base::Result<Journal> open(const std::string& path);
 
     /// Whether the journal, when it was opened, listed this item in this state as successful.
     bool hasDone(const JournalItem& item) const;
 
     /// Appends the result of an artefact. Returns an error if it cannot be written.
-    foundation::Result<void> add(const JournalItem& item, int exitStatus, retrieval::Cause cause);
+    base::Result<void> add(const JournalItem& item, int exitStatus, retrieval::Cause cause);
 
     /// Appends an "ended" line, which cancels all earlier lines of the operation.
-    foundation::Result<void> end(std::uint8_t operation);
+    base::Result<void> end(std::uint8_t operation);
 
     /// Returns when the whole journal is on stable storage.
-    foundation::Result<void> synchronize();
+    base::Result<void> synchronize();
 
   private:
-    Journal(std::string path, foundation::FileDescriptor file)
-        : path_(std::move(path)), file_(std::move(file)) {}
-    foundation::Result<void> read();
+    Journal(std::string path, base::FileDescriptor file) : path_(std::move(path)), file_(std::move(file)) {}
+    base::Result<void> read();
     void readLine(std::string_view line);
-    foundation::Result<void> append(std::string_view text);
+    base::Result<void> append(std::string_view text);
 
     std::string path_;
-    foundation::FileDescriptor file_;
+    base::FileDescriptor file_;
     bool endsWithinALine_ = false;  // after an incomplete write
 
     // From the operation's name and the path, as in the file, to the state and the record's name. As digests,

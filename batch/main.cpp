@@ -19,13 +19,13 @@
 #include "batch/settings.h"
 #include "companion/process.h"
 #include "companion/streams.h"
-#include "foundation/format.h"
-#include "foundation/process.h"
+#include "runtime/process.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"
 #include "src/messages.h"
 #include "src/platform.h"
+#include "values/format.h"
 
 namespace {
 
@@ -54,7 +54,7 @@ class Progress {
         last_ = now;
         isOnScreen_ = true;
         std::string line =
-            foundation::format("%llu done, %llu of them failed, %zu in work", done, failed, inWork);
+            values::format("%llu done, %llu of them failed, %zu in work", done, failed, inWork);
         line.resize(std::min(line.size(), columns() - 1));  // a second line could not be cleared
         errors_.write(kEraseLine + line);
     }
@@ -96,8 +96,7 @@ class Run {
         summary_.operation = nameOfOperation(settings.operation);
     }
 
-    int work(const Platform& platform, companion::PathList& paths,
-             const foundation::FileDescriptor& signals) {
+    int work(const Platform& platform, companion::PathList& paths, const base::FileDescriptor& signals) {
         const auto begun = retrieval::Clock::now();
         Coordinator coordinator(settings_, platform, paths, signals, events());
         const std::optional<int> signal = coordinator.run();
@@ -168,7 +167,7 @@ class Run {
     }
 
     // Only the first failure to write a file of ours is reported; the artefacts matter more.
-    void keep(const foundation::Result<void>& result) {
+    void keep(const base::Result<void>& result) {
         if (result || hasComplained_) return;
         hasComplained_ = true;
         progress_.clear();
@@ -217,7 +216,7 @@ void giveUpRights(const Settings& settings, const Platform& platform, const std:
         if (settings.isVerbose) complain(missing);
 }
 
-int runBatch(const Settings& settings, const foundation::FileDescriptor& signals) {
+int runBatch(const Settings& settings, const base::FileDescriptor& signals) {
     // Lines are collected for each artefact: other threads print nothing.
     verboseLevel = settings.isVerbose ? kVerbosityVerbose : kVerbosityQuiet;
 
@@ -265,14 +264,14 @@ int runBatch(const Settings& settings, const foundation::FileDescriptor& signals
 int main(int argc, char** argv) {
     // With a heap for each thread, memory would grow with --jobs.
     mallopt(M_ARENA_MAX, kMostArenas);
-    foundation::occupyStandardStreams();
+    runtime::occupyStandardStreams();
     // A closed pipe, and a file that would exceed the caller's limit, become failed writes.
     std::signal(SIGPIPE, SIG_IGN);
     std::signal(SIGXFSZ, SIG_IGN);
     try {
         const CommandLine line = readCommandLine(argc, argv);
         if (line.exitStatus) return *line.exitStatus;
-        const foundation::FileDescriptor signals = companion::takeEndingSignals();
+        const base::FileDescriptor signals = companion::takeEndingSignals();
         return runBatch(line.settings, signals);
     } catch (const std::exception& error) {
         complain(error.what());

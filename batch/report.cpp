@@ -14,15 +14,16 @@
 #include <nlohmann/json.hpp>
 #include <utility>
 
-#include "foundation/file_io.h"
-#include "foundation/format.h"
-#include "foundation/markup.h"
+#include "base/file_io.h"
+#include "base/handle.h"
+#include "base/text.h"
 #include "src/DownloadDelegate.h"
+#include "values/format.h"
 
 namespace pinwell::batch {
 
-using foundation::Error;
-using foundation::Result;
+using base::Error;
+using base::Result;
 using retrieval::Cause;
 using Json = nlohmann::ordered_json;
 
@@ -71,10 +72,10 @@ std::string asText(const Summary& summary) {
         text += separator + std::to_string(number) + " " + std::string(nameOf(cause));
         separator = ", ";
     }
-    if (summary.resumed > 0) text += foundation::format("; %llu done before", summary.resumed);
-    if (summary.duplicates > 0) text += foundation::format("; %llu named twice", summary.duplicates);
+    if (summary.resumed > 0) text += values::format("; %llu done before", summary.resumed);
+    if (summary.duplicates > 0) text += values::format("; %llu named twice", summary.duplicates);
     const auto tenths = static_cast<std::uint64_t>(std::llround(summary.seconds * 10));
-    return text + foundation::format("; %llu.%llu s", tenths / 10, tenths % 10);
+    return text + values::format("; %llu.%llu s", tenths / 10, tenths % 10);
 }
 
 namespace {
@@ -97,12 +98,12 @@ std::string prologue(std::string_view counts) {
 }
 
 Error refusal(std::string text) {
-    return {foundation::kDataErrorDomain, foundation::kMalformedDocument, std::move(text)};
+    return {base::kDataErrorDomain, base::kMalformedDocument, std::move(text)};
 }
 
 bool beginsAsXml(const std::string& path) {
     constexpr std::string_view kBeginning = "<?xml";
-    const auto file = foundation::openRegularFile(path, O_RDONLY);
+    const auto file = base::openRegularFile(path, O_RDONLY);
     std::array<char, kBeginning.size()> bytes{};
     return file &&
            ::read(file->descriptor.get(), bytes.data(), bytes.size()) == static_cast<ssize_t>(bytes.size()) &&
@@ -133,7 +134,7 @@ Result<JUnitReport> JUnitReport::begin(const std::string& name) {
     if (!place) return place.error();
     const std::string& path = *place;
     std::string temporary = path + ".XXXXXX";
-    foundation::FileDescriptor file(::mkostemp(temporary.data(), O_CLOEXEC));
+    base::FileDescriptor file(::mkostemp(temporary.data(), O_CLOEXEC));
     if (!file) return Error::posix(errno, path);
     const mode_t mask = ::umask(0);
     ::umask(mask);
@@ -156,8 +157,7 @@ JUnitReport::~JUnitReport() {
 
 void JUnitReport::add(const Report& report) {
     std::string text = "<testcase classname=\"pinwell." + std::string(report.operation) + "\" name=\"" +
-                       foundation::markupText(report.path) + "\" time=\"" + secondsText(report.seconds) +
-                       "\"";
+                       base::markupText(report.path) + "\" time=\"" + secondsText(report.seconds) + "\"";
     if (report.cause == Cause::worked) {
         write(text + "/>\n");
         return;
@@ -166,7 +166,7 @@ void JUnitReport::add(const Report& report) {
     const char* const element = isVerdict(report.cause) ? "failure" : "error";
     text += std::string(">\n<") + element + " type=\"" + std::string(nameOf(report.cause)) + "\" message=\"" +
             std::string(nameOf(report.cause)) + ": exit status " + std::to_string(report.exitStatus) + "\">";
-    for (const std::string& message : report.messages) text += foundation::markupText(message) + "\n";
+    for (const std::string& message : report.messages) text += base::markupText(message) + "\n";
     write(text + "</" + element + ">\n</testcase>\n");
 }
 
@@ -177,7 +177,7 @@ Result<void> JUnitReport::finish(const Summary& summary) {
     const std::uint64_t failures = summary.total - summary.numberOf(Cause::worked) - errors;
     write("</testsuite>\n</testsuites>\n");
     flush();
-    const std::string head = prologue(foundation::format(
+    const std::string head = prologue(values::format(
         "name=\"pinwell-batch %@\" tests=\"%llu\" failures=\"%llu\" "
         "errors=\"%llu\" skipped=\"0\" time=\"%@\"",
         std::string(summary.operation), summary.total, failures, errors, secondsText(summary.seconds)));

@@ -7,8 +7,8 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/error.h"
-#include "foundation/file_io.h"
+#include "base/error.h"
+#include "base/handle.h"
 #include "retrieval/report.h"
 
 namespace pinwell::batch {
@@ -47,7 +47,7 @@ std::string asText(const Summary& summary);
 class JUnitReport {
   public:
     /// Returns an error that names the path if it is not a regular file or cannot be written.
-    static foundation::Result<JUnitReport> begin(const std::string& name);
+    static base::Result<JUnitReport> begin(const std::string& name);
     JUnitReport(JUnitReport&& other) noexcept;
     JUnitReport& operator=(JUnitReport&&) = delete;
     ~JUnitReport();
@@ -58,17 +58,17 @@ class JUnitReport {
     void add(const Report& report);
 
     /// Returns an error if any of it could not be written.
-    foundation::Result<void> finish(const Summary& summary);
+    base::Result<void> finish(const Summary& summary);
 
   private:
-    JUnitReport(std::string path, std::string temporary, foundation::FileDescriptor file)
+    JUnitReport(std::string path, std::string temporary, base::FileDescriptor file)
         : path_(std::move(path)), temporary_(std::move(temporary)), file_(std::move(file)) {}
     void write(const std::string& text);
     void flush();
 
     std::string path_;
     std::string temporary_;  // empty if the report is in place, or moved from
-    foundation::FileDescriptor file_;
+    base::FileDescriptor file_;
     std::string pending_;
     int failure_ = 0;  // errno of the first write that failed
 };

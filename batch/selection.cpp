@@ -7,8 +7,8 @@
 #include <filesystem>
 #include <memory>
 
+#include "base/bytes.h"
 #include "codesign/code_directory.h"
-#include "foundation/bytes.h"
 
 namespace pinwell::batch {
 namespace {
@@ -51,7 +51,7 @@ std::string canonicalPath(const std::string& path) {
 }
 
 TextDigest digestOf(std::string_view text) {
-    const foundation::Data bytes = codesign::digest(codesign::DigestType::sha256, foundation::asBytes(text));
+    const base::Data bytes = codesign::digest(codesign::DigestType::sha256, base::asBytes(text));
     TextDigest digest;
     std::memcpy(&digest.first, bytes.data(), sizeof digest.first);
     std::memcpy(&digest.second, bytes.data() + sizeof digest.first, sizeof digest.second);

@@ -22,7 +22,7 @@ constexpr std::uint64_t kMostJobs = 1024;
 constexpr std::uint64_t kMostRetries = 1000;
 constexpr std::uint64_t kMostShards = 1'000'000;
 
-foundation::Result<void> takeShard(const std::string& text, Settings& settings) {
+base::Result<void> takeShard(const std::string& text, Settings& settings) {
     const std::size_t slash = text.find('/');
     if (slash == std::string::npos) return companion::wrongValue("is not I/N");
     const auto shards = readCount(text.substr(slash + 1), 1, kMostShards);

@@ -10,7 +10,7 @@
 #include <thread>
 #include <vector>
 
-#include "foundation/file_io.h"
+#include "base/handle.h"
 
 namespace pinwell::batch {
 
@@ -56,7 +56,7 @@ class WakeUp {
     int descriptor() const noexcept { return event_.get(); }
 
   private:
-    foundation::FileDescriptor event_;
+    base::FileDescriptor event_;
 };
 
 }  // namespace pinwell::batch

@@ -17,7 +17,7 @@
 
 namespace {
 
-using pinwell::foundation::Data;
+using pinwell::base::Data;
 using pinwell::test::CostlyInput;
 using pinwell::test::MeasuredRead;
 

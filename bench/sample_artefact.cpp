@@ -17,16 +17,16 @@
 #include <random>
 #include <string_view>
 
-#include "foundation/format.h"
 #include "lumora-local/ad_hoc_signature.h"
 #include "lumora-local/samples.h"
 #include "support/archive_builder.h"
 #include "support/disk_image_builder.h"
 #include "support/temporary_directory.h"
+#include "values/format.h"
 
 namespace {
 
-using pinwell::foundation::Data;
+using pinwell::base::Data;
 using pinwell::test::ArchiveBuilder;
 using pinwell::test::DiskImageBuilder;
 
@@ -37,14 +37,14 @@ void writeAt(std::uint64_t offset, const Data& bytes, const char* path) {
     std::fstream file(path, std::ios::binary | std::ios::in | std::ios::out);
     file.exceptions(std::ios::failbit | std::ios::badbit);
     file.seekp(static_cast<std::streamoff>(offset));
-    const std::string text = pinwell::foundation::toString(bytes);
+    const std::string text = pinwell::base::toString(bytes);
     file.write(text.data(), static_cast<std::streamsize>(text.size()));
     file.close();
 }
 
 /// Holds the image in memory: this program is not measured.
 void signPages(const char* path) {
-    const Data contents = pinwell::foundation::toData(pinwell::test::readFile(path));
+    const Data contents = pinwell::base::toData(pinwell::test::readFile(path));
     constexpr std::uint32_t kTrailerSlot = 6;
     const Data superblob =
         pinwell::lumora::AdHocSignature{.identifier = "com.example.benchmark",
@@ -60,7 +60,7 @@ void writeBundle(const std::string& bundle, int files, std::size_t size) {
     std::mt19937_64 random(1);  // NOLINT: the same files in every run
     pinwell::lumora::ResourceSeal seal;
     for (int i = 0; i < files; ++i) {
-        const std::string path = pinwell::foundation::format("Resources/%d/%d", i % 100, i);
+        const std::string path = pinwell::values::format("Resources/%d/%d", i % 100, i);
         Data bytes(size);
         for (std::byte& byte : bytes) byte = static_cast<std::byte>(random());
         pinwell::test::writeFile(contents + path, bytes);
@@ -79,9 +79,9 @@ void writeBundle(const std::string& bundle, int files, std::size_t size) {
 
 void writeImages(const std::string& folder, int count) {
     for (int i = 1; i <= count; ++i) {
-        const std::string data = pinwell::foundation::format("image %d of %d", i, count);
-        pinwell::test::writeFile(pinwell::foundation::format("%@/Image%d.dmg", folder, i),
-                                 DiskImageBuilder().data(pinwell::foundation::toData(data)).build());
+        const std::string data = pinwell::values::format("image %d of %d", i, count);
+        pinwell::test::writeFile(pinwell::values::format("%@/Image%d.dmg", folder, i),
+                                 DiskImageBuilder().data(pinwell::base::toData(data)).build());
     }
 }
 

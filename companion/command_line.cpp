@@ -11,8 +11,8 @@
 #include <cstdlib>
 #include <numeric>
 
-#include "foundation/description.h"
-#include "foundation/format.h"
+#include "base/text.h"
+#include "values/format.h"
 
 namespace pinwell::companion {
 namespace {
@@ -183,7 +183,7 @@ class Reader {
 }  // namespace
 
 void complain(std::string_view program, std::string_view text) {
-    write(STDERR_FILENO, std::string(program) + ": " + foundation::escapeForTerminal(text) + "\n");
+    write(STDERR_FILENO, std::string(program) + ": " + base::escapeForTerminal(text) + "\n");
 }
 
 std::string_view nearestWord(std::string_view word, std::span<const std::string_view> words) {
@@ -231,12 +231,11 @@ Parsed parseCommand(const Program& program, int argc, char** argv) {
     return {.exitStatus = EX_USAGE, .command = nullptr, .arguments = {}};
 }
 
-foundation::Error wrongValue(std::string fault) {
-    return {foundation::kDataErrorDomain, foundation::kMalformedDocument, std::move(fault)};
+base::Error wrongValue(std::string fault) {
+    return {base::kDataErrorDomain, base::kMalformedDocument, std::move(fault)};
 }
 
-foundation::Result<std::uint64_t> readCount(std::string_view text, std::uint64_t lowest,
-                                            std::uint64_t highest) {
+base::Result<std::uint64_t> readCount(std::string_view text, std::uint64_t lowest, std::uint64_t highest) {
     std::uint64_t number = 0;
     const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
     const bool isNumber = error == std::errc{} && end == text.data() + text.size() && !text.empty();
@@ -246,7 +245,7 @@ foundation::Result<std::uint64_t> readCount(std::string_view text, std::uint64_t
     return number;
 }
 
-foundation::Result<Seconds> readSeconds(std::string_view text) {
+base::Result<Seconds> readSeconds(std::string_view text) {
     double number = 0;
     const auto [end, error] =
         std::from_chars(text.data(), text.data() + text.size(), number, std::chars_format::fixed);
@@ -258,14 +257,14 @@ foundation::Result<Seconds> readSeconds(std::string_view text) {
 Option flagOption(std::string name, char letter, std::string help, bool& value) {
     return {std::move(name), letter, "", std::move(help), [&value](const std::string&) {
                 value = true;
-                return foundation::Result<void>();
+                return base::Result<void>();
             }};
 }
 
 Option textOption(std::string name, char letter, std::string argument, std::string help,
                   std::optional<std::string>& value) {
     return {std::move(name), letter, std::move(argument), std::move(help),
-            [&value](const std::string& given) -> foundation::Result<void> {
+            [&value](const std::string& given) -> base::Result<void> {
                 if (given.empty()) return wrongValue("is empty");
                 if (value) return wrongValue("is given twice");
                 value = given;
@@ -278,11 +277,11 @@ std::vector<Option> outputOptions(ColorWhen& color, bool& isQuiet, bool& isVerbo
         return [&set, &other](const std::string&) {
             set = true;
             other = false;
-            return foundation::Result<void>();
+            return base::Result<void>();
         };
     };
     return {{"color", 0, "WHEN", "Colour the lines: auto, always or never (default: auto)",
-             [&color](const std::string& word) -> foundation::Result<void> {
+             [&color](const std::string& word) -> base::Result<void> {
                  if (word != "auto" && word != "always" && word != "never")
                      return wrongValue("is none of: auto, always, never");
                  color = colorWhenNamed(word);
@@ -293,9 +292,9 @@ std::vector<Option> outputOptions(ColorWhen& color, bool& isQuiet, bool& isVerbo
 }
 
 std::string versionText(std::string_view program) {
-    return foundation::format("%s %s (commit %s, OpenSSL %s, curl %s)", program, PINWELL_VERSION,
-                              PINWELL_COMMIT, OpenSSL_version(OPENSSL_VERSION_STRING),
-                              curl_version_info(CURLVERSION_NOW)->version);
+    return values::format("%s %s (commit %s, OpenSSL %s, curl %s)", program, PINWELL_VERSION, PINWELL_COMMIT,
+                          OpenSSL_version(OPENSSL_VERSION_STRING),
+                          curl_version_info(CURLVERSION_NOW)->version);
 }
 
 std::string versionNumber() {

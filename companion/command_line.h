@@ -23,8 +23,8 @@
 #include <utility>
 #include <vector>
 
+#include "base/error.h"
 #include "companion/streams.h"
-#include "foundation/error.h"
 
 namespace CLI {
 class App;
@@ -37,7 +37,7 @@ using Seconds = std::chrono::duration<double>;
 
 /// Takes an option's value, empty for an option without a value. The reason of an error is the fault of a
 /// wrong value, such as "is not a number".
-using TakeOption = std::function<foundation::Result<void>(const std::string& value)>;
+using TakeOption = std::function<base::Result<void>(const std::string& value)>;
 
 struct Option {
     std::string name;      // without dashes
@@ -75,14 +75,13 @@ Parsed parseCommand(const Program& program, int argc, char** argv);
 // Values. The reason of an error is the fault of the text, as TakeOption has it.
 
 /// A whole number between the two bounds.
-foundation::Result<std::uint64_t> readCount(std::string_view text, std::uint64_t lowest,
-                                            std::uint64_t highest);
+base::Result<std::uint64_t> readCount(std::string_view text, std::uint64_t lowest, std::uint64_t highest);
 
 /// Seconds, with or without decimals, up to ten years.
-foundation::Result<Seconds> readSeconds(std::string_view text);
+base::Result<Seconds> readSeconds(std::string_view text);
 
 /// The fault of a value.
-foundation::Error wrongValue(std::string fault);
+base::Error wrongValue(std::string fault);
 
 // Options. Each sets a value that must outlive it. `name`, `letter`, `argument` and `help` as in Option.
 
@@ -97,7 +96,7 @@ template <class Number>
 Option countOption(std::string name, char letter, std::string argument, std::string help,
                    std::uint64_t lowest, std::uint64_t highest, Number& value) {
     return {std::move(name), letter, std::move(argument), std::move(help),
-            [lowest, highest, &value](const std::string& text) -> foundation::Result<void> {
+            [lowest, highest, &value](const std::string& text) -> base::Result<void> {
                 const auto count = readCount(text, lowest, highest);
                 if (!count) return count.error();
                 value = static_cast<Number>(*count);
@@ -109,7 +108,7 @@ Option countOption(std::string name, char letter, std::string argument, std::str
 template <class Time>
 Option secondsOption(std::string name, std::string help, Time& value) {
     return {std::move(name), 0, "SECONDS", std::move(help),
-            [&value](const std::string& text) -> foundation::Result<void> {
+            [&value](const std::string& text) -> base::Result<void> {
                 const auto seconds = readSeconds(text);
                 if (!seconds) return seconds.error();
                 value = *seconds;

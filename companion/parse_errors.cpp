@@ -3,8 +3,9 @@
 #include <string_view>
 #include <vector>
 
+#include "base/text.h"
 #include "companion/command_line.h"
-#include "foundation/description.h"
+#include "values/format.h"
 
 namespace pinwell::companion {
 namespace {
@@ -65,9 +66,9 @@ std::string describe(const CLI::App& app, const CLI::ParseError& error) {
     const auto kind = static_cast<CLI::ExitCodes>(error.get_exit_code());
     if (kind == CLI::ExitCodes::ExtrasError || kind == CLI::ExitCodes::RequiredError) {
         const std::string rest = describeRest(app);
-        if (!rest.empty()) return foundation::escapeForTerminal(rest);
+        if (!rest.empty()) return base::escapeForTerminal(rest);
     }
-    return foundation::escapeForTerminal(error.what());
+    return base::escapeForTerminal(error.what());
 }
 
 }  // namespace pinwell::companion

@@ -14,19 +14,19 @@
 #include <system_error>
 #include <utility>
 
-#include "foundation/process.h"
+#include "runtime/process.h"
 
 namespace pinwell::companion {
 namespace {
 
-foundation::FileDescriptor owned(int number, const char* call) {
+base::FileDescriptor owned(int number, const char* call) {
     if (number < 0) throw std::system_error(errno, std::generic_category(), call);
-    return foundation::FileDescriptor(number);
+    return base::FileDescriptor(number);
 }
 
 }  // namespace
 
-foundation::FileDescriptor takeEndingSignals() {
+base::FileDescriptor takeEndingSignals() {
     sigset_t ending;
     sigemptyset(&ending);
     for (const int number : {SIGHUP, SIGINT, SIGTERM}) {
@@ -38,13 +38,13 @@ foundation::FileDescriptor takeEndingSignals() {
     return owned(::signalfd(-1, &ending, SFD_CLOEXEC | SFD_NONBLOCK), "signalfd");
 }
 
-std::optional<int> nextEndingSignal(const foundation::FileDescriptor& signals) {
+std::optional<int> nextEndingSignal(const base::FileDescriptor& signals) {
     signalfd_siginfo info{};
     if (::read(signals.get(), &info, sizeof info) != sizeof info) return std::nullopt;
     return static_cast<int>(info.ssi_signo);
 }
 
-SignalWatch::SignalWatch(foundation::FileDescriptor signals, std::function<void(int number)> react)
+SignalWatch::SignalWatch(base::FileDescriptor signals, std::function<void(int number)> react)
     : signals_(std::move(signals)),
       end_(owned(::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK), "eventfd")),
       thread_([this, react = std::move(react)] {
@@ -62,9 +62,9 @@ SignalWatch::~SignalWatch() {
     thread_.join();
 }
 
-foundation::Result<OwnTemporaryDirectory> OwnTemporaryDirectory::make(const std::string& name) {
-    std::string path = foundation::temporaryDirectory().appendingPathComponent(name + "-XXXXXX").path();
-    if (::mkdtemp(path.data()) == nullptr) return foundation::Error::posix(errno, path);
+base::Result<OwnTemporaryDirectory> OwnTemporaryDirectory::make(const std::string& name) {
+    std::string path = runtime::temporaryDirectory().appendingPathComponent(name + "-XXXXXX").path();
+    if (::mkdtemp(path.data()) == nullptr) return base::Error::posix(errno, path);
     ::setenv("TMPDIR", path.c_str(), 1);
     return OwnTemporaryDirectory(std::move(path));
 }

@@ -6,8 +6,8 @@
 #include <string>
 #include <thread>
 
-#include "foundation/error.h"
-#include "foundation/file_io.h"
+#include "base/error.h"
+#include "base/handle.h"
 
 namespace pinwell::companion {
 
@@ -17,23 +17,23 @@ inline constexpr int kSignalBase = 128;
 /// Blocks SIGHUP, SIGINT and SIGTERM in the calling thread, and in the threads that it starts. Returns a
 /// descriptor from which they can be read (signalfd(2)). A signal ignored from the start, for example by
 /// nohup(1), stays ignored.
-foundation::FileDescriptor takeEndingSignals();
+base::FileDescriptor takeEndingSignals();
 
 /// The next pending signal; `nullopt` if there is none.
-std::optional<int> nextEndingSignal(const foundation::FileDescriptor& signals);
+std::optional<int> nextEndingSignal(const base::FileDescriptor& signals);
 
 /// A thread that waits for these signals while the others work.
 class SignalWatch {
   public:
     /// `react` is called once, on the watch's thread, for the first signal that comes.
-    SignalWatch(foundation::FileDescriptor signals, std::function<void(int number)> react);
+    SignalWatch(base::FileDescriptor signals, std::function<void(int number)> react);
     ~SignalWatch();
     SignalWatch(const SignalWatch&) = delete;
     SignalWatch& operator=(const SignalWatch&) = delete;
 
   private:
-    foundation::FileDescriptor signals_;
-    foundation::FileDescriptor end_;
+    base::FileDescriptor signals_;
+    base::FileDescriptor end_;
     std::thread thread_;
 };
 
@@ -43,7 +43,7 @@ class SignalWatch {
 class OwnTemporaryDirectory {
   public:
     /// `name` begins the directory's name.
-    static foundation::Result<OwnTemporaryDirectory> make(const std::string& name);
+    static base::Result<OwnTemporaryDirectory> make(const std::string& name);
 
     OwnTemporaryDirectory(OwnTemporaryDirectory&& other) noexcept;
     OwnTemporaryDirectory& operator=(OwnTemporaryDirectory&&) = delete;

@@ -20,21 +20,21 @@ bool isSet(const char* value) {
 
 }  // namespace
 
-foundation::Result<PathList> PathList::open(std::vector<std::string> paths,
-                                            const std::optional<std::string>& from, bool isZeroTerminated) {
-    foundation::FileDescriptor file;
+base::Result<PathList> PathList::open(std::vector<std::string> paths, const std::optional<std::string>& from,
+                                      bool isZeroTerminated) {
+    base::FileDescriptor file;
     if (from) {
         // Standard input is duplicated, because this object closes its descriptor.
         // Opening does not wait for a pipe's writer, because no signal would end the wait here.
         const int number = *from == "-" ? ::fcntl(STDIN_FILENO, F_DUPFD_CLOEXEC, 3)
                                         : ::open(from->c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY | O_NONBLOCK);
-        if (number < 0) return foundation::Error::posix(errno, *from);
-        file = foundation::FileDescriptor(number);
+        if (number < 0) return base::Error::posix(errno, *from);
+        file = base::FileDescriptor(number);
     }
     return PathList(std::move(paths), std::move(file), from.value_or(""), isZeroTerminated ? '\0' : '\n');
 }
 
-PathList::PathList(std::vector<std::string> paths, foundation::FileDescriptor file, std::string name,
+PathList::PathList(std::vector<std::string> paths, base::FileDescriptor file, std::string name,
                    char separator)
     : paths_(std::move(paths)),
       file_(std::move(file)),
@@ -89,7 +89,7 @@ PathList::State PathList::fill() {
     const ssize_t count = ::read(file_.get(), buffer_.data(), buffer_.size());
     if (count < 0 && (errno == EINTR || errno == EAGAIN)) return State::wait;
     if (count < 0) {
-        error_ = foundation::Error::posix(errno, name_);
+        error_ = base::Error::posix(errno, name_);
         return State::broken;
     }
     begin_ = 0;

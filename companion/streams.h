@@ -10,8 +10,8 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/error.h"
-#include "foundation/file_io.h"
+#include "base/error.h"
+#include "base/handle.h"
 
 namespace pinwell::companion {
 
@@ -21,8 +21,8 @@ inline constexpr std::size_t kLongestPath = 4096;
 class PathList {
   public:
     /// `from` is a file, "-" is standard input. An error names a file that cannot be opened.
-    static foundation::Result<PathList> open(std::vector<std::string> paths,
-                                             const std::optional<std::string>& from, bool isZeroTerminated);
+    static base::Result<PathList> open(std::vector<std::string> paths, const std::optional<std::string>& from,
+                                       bool isZeroTerminated);
 
     enum class State : std::uint8_t {
         path,
@@ -46,18 +46,17 @@ class PathList {
     int descriptor() const noexcept { return file_.get(); }
 
     /// For `broken`.
-    const std::optional<foundation::Error>& error() const noexcept { return error_; }
+    const std::optional<base::Error>& error() const noexcept { return error_; }
 
   private:
-    PathList(std::vector<std::string> paths, foundation::FileDescriptor file, std::string name,
-             char separator);
+    PathList(std::vector<std::string> paths, base::FileDescriptor file, std::string name, char separator);
     std::optional<std::string> takeLine();
     State fill();
 
     std::vector<std::string> paths_;
     std::size_t nextPath_ = 0;
 
-    foundation::FileDescriptor file_;
+    base::FileDescriptor file_;
     std::string name_;
     char separator_;
     std::vector<char> buffer_;
@@ -65,7 +64,7 @@ class PathList {
     std::size_t end_ = 0;
     bool ended_ = false;
     std::string line_;  // the part of the next line read so far
-    std::optional<foundation::Error> error_;
+    std::optional<base::Error> error_;
 };
 
 enum class ColorWhen { automatic, always, never };

@@ -2,8 +2,9 @@
 
 #include <set>
 
+#include "base/text.h"
 #include "formats/tm_ticket.h"
-#include "foundation/format.h"
+#include "values/format.h"
 
 namespace pinwell {
 namespace {
@@ -29,10 +30,10 @@ std::vector<CodeHash> listableHashes(const CodeHash& own, const std::vector<Code
     return hashes;
 }
 
-std::string recordNameForHash(std::uint32_t algorithm, foundation::ByteView hash) {
-    const std::string hex = foundation::toHex(hash);
-    if (algorithm == 0) return foundation::format("%d/%@", kRecordNameVersionPlain, hex);
-    return foundation::format("%d/%d/%@", kRecordNameVersionWithAlgorithm, algorithm, hex);
+std::string recordNameForHash(std::uint32_t algorithm, base::ByteView hash) {
+    const std::string hex = base::toHex(hash);
+    if (algorithm == 0) return values::format("%d/%@", kRecordNameVersionPlain, hex);
+    return values::format("%d/%d/%@", kRecordNameVersionWithAlgorithm, algorithm, hex);
 }
 
 }  // namespace pinwell

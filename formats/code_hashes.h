@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell {
 
@@ -14,7 +14,7 @@ namespace pinwell {
 /// unknown digest type; the hash then has 20 bytes.
 struct CodeHash {
     std::uint32_t algorithm = 0;
-    foundation::Data hash;
+    base::Data hash;
 
     auto operator<=>(const CodeHash&) const = default;
 };
@@ -28,6 +28,6 @@ std::vector<CodeHash> listableHashes(const CodeHash& own, const std::vector<Code
 
 /// The name of the record that holds the ticket for a code hash: "2/ALGORITHM/HEX", or "1/HEX" if the
 /// algorithm is 0.
-std::string recordNameForHash(std::uint32_t algorithm, foundation::ByteView hash);
+std::string recordNameForHash(std::uint32_t algorithm, base::ByteView hash);
 
 }  // namespace pinwell

@@ -4,15 +4,14 @@
 #include <array>
 #include <limits>
 
-#include "foundation/byte_reader.h"
-#include "foundation/byte_writer.h"
-#include "foundation/process.h"
+#include "base/byte_io.h"
+#include "runtime/process.h"
 
 namespace pinwell {
 namespace {
 
-using foundation::ByteReader;
-using foundation::ByteView;
+using base::ByteReader;
+using base::ByteView;
 
 constexpr std::size_t kUDIFVersionOffset = 4;
 constexpr std::size_t kUDIFHeaderSizeOffset = 8;
@@ -102,7 +101,7 @@ std::uint64_t UDIFFileHeader::codeSignLength() const {
 
 void UDIFFileHeader::setCodeSign(std::uint64_t offset, std::uint64_t length) {
     static_assert(kCodeSignLengthOffset == kUDIFCodeSignFieldsOffset + sizeof offset);
-    const auto fields = foundation::ByteWriter().be64(offset).be64(length).data();
+    const auto fields = base::ByteWriter().be64(offset).be64(length).data();
     std::copy(fields.begin(), fields.end(), bytes_.begin() + kUDIFCodeSignFieldsOffset);
 }
 
@@ -139,7 +138,7 @@ bool readDiskImageTrailer(files::FileReader& file, const std::string& name, disk
     }
     if (into.trailer.version() != kUDIFVersion) {
         diagnostics.note("%@ only supports version %d disk images while %@ is version %d.",
-                         foundation::processName(), kUDIFVersion, name, into.trailer.version());
+                         runtime::processName(), kUDIFVersion, name, into.trailer.version());
         return into.refuse(trailerStart + 4, "the trailer's version is not 4");
     }
     into.csStart = into.trailer.codeSignOffset();

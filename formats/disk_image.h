@@ -38,11 +38,10 @@
 #include <optional>
 #include <string>
 
+#include "base/bytes.h"
 #include "files/file_reader.h"
 #include "formats/findings.h"
 #include "formats/superblob.h"
-#include "foundation/bytes.h"
-#include "foundation/sparse_bytes.h"
 
 namespace pinwell {
 
@@ -56,7 +55,7 @@ inline constexpr std::uint32_t kUDIFVersion = 4;
 class UDIFFileHeader {
   public:
     /// Copies `bytes` if there are exactly 512; returns whether there are.
-    bool assign(foundation::ByteView bytes);
+    bool assign(base::ByteView bytes);
 
     bool hasMagic() const;
 
@@ -73,13 +72,13 @@ class UDIFFileHeader {
     std::uint64_t codeSignLength() const;
 
     /// The checksums: type (4), length (4), data (128). Views of this object.
-    foundation::ByteView dataForkChecksum() const;
-    foundation::ByteView masterChecksum() const;
+    base::ByteView dataForkChecksum() const;
+    base::ByteView masterChecksum() const;
 
     /// Changes only the two code-signature fields.
     void setCodeSign(std::uint64_t offset, std::uint64_t length);
 
-    foundation::ByteView bytes() const noexcept { return bytes_; }
+    base::ByteView bytes() const noexcept { return bytes_; }
 
   private:
     std::array<std::byte, kUDIFHeaderSize> bytes_{};
@@ -92,7 +91,7 @@ struct disk_image_signature {
     std::uint64_t fileSize = 0;
     std::uint64_t csStart = 0;
     std::uint64_t csLength = 0;
-    foundation::SharedBytes superblob;
+    base::SharedBytes superblob;
     std::uint32_t numBlobs = 0;  // as stated
     BlobSet blobs;               // views of the superblob
 
@@ -126,6 +125,6 @@ bool readDiskImageBlobs(const std::string& name, disk_image_signature& into,
 const BlobRecord* ticketBlobOf(const BlobSet& blobs);
 
 /// The ticket in its blob: the bytes after the blob's header.
-foundation::ByteView ticketIn(const BlobRecord& blob);
+base::ByteView ticketIn(const BlobRecord& blob);
 
 }  // namespace pinwell

@@ -4,13 +4,13 @@
 #include <limits>
 #include <utility>
 
-#include "foundation/format.h"
-#include "foundation/value.h"
+#include "values/format.h"
+#include "values/value.h"
 
 namespace pinwell {
 namespace {
 
-using foundation::ByteView;
+using base::ByteView;
 
 // Of a payload.
 constexpr std::uint64_t kFlagsOffset = 12;
@@ -112,7 +112,7 @@ std::optional<TicketRefusal> explainRevoked(ByteView ticket, const tm_ticket* ge
 }
 
 // `isListed` is asked only about a ticket that is genuine and not revoked.
-TicketVerdict judgeWith(const std::optional<foundation::Data>& ticket, trust::TrustService& trust,
+TicketVerdict judgeWith(const std::optional<base::Data>& ticket, trust::TrustService& trust,
                         const std::function<bool(const tm_ticket* genuine)>& isListed) {
     if (!ticket || ticket->empty()) return TicketVerdict::refused;
     if (ticket->size() > std::numeric_limits<std::uint32_t>::max()) return TicketVerdict::refused;
@@ -124,8 +124,8 @@ TicketVerdict judgeWith(const std::optional<foundation::Data>& ticket, trust::Tr
 }
 
 // Sorted, so that many hashes are found in a long list without comparing each with each.
-std::vector<foundation::Data> hashesIn(const tm_ticket* ticket) {
-    std::vector<foundation::Data> hashes;
+std::vector<base::Data> hashesIn(const tm_ticket* ticket) {
+    std::vector<base::Data> hashes;
     const std::uint32_t count = tm_ticket_get_cdhash_count(ticket);
     for (std::uint32_t i = 0; i < count; ++i) {
         tm_cdhash entry;
@@ -138,8 +138,8 @@ std::vector<foundation::Data> hashesIn(const tm_ticket* ticket) {
 
 }  // namespace
 
-TicketVerdict judgeTicket(const std::optional<foundation::Data>& ticket,
-                          const std::function<std::optional<foundation::Data>()>& hash,
+TicketVerdict judgeTicket(const std::optional<base::Data>& ticket,
+                          const std::function<std::optional<base::Data>()>& hash,
                           trust::TrustService& trust) {
     return judgeWith(ticket, trust, [&](const tm_ticket* decoded) {
         const auto wanted = hash();
@@ -147,14 +147,13 @@ TicketVerdict judgeTicket(const std::optional<foundation::Data>& ticket,
     });
 }
 
-TicketVerdict judgeTicket(const std::optional<foundation::Data>& ticket,
-                          const std::vector<foundation::Data>& hashes, trust::TrustService& trust) {
+TicketVerdict judgeTicket(const std::optional<base::Data>& ticket, const std::vector<base::Data>& hashes,
+                          trust::TrustService& trust) {
     return judgeWith(ticket, trust, [&](const tm_ticket* decoded) {
-        const std::vector<foundation::Data> listed = hashesIn(decoded);
-        return !hashes.empty() &&
-               std::all_of(hashes.begin(), hashes.end(), [&](const foundation::Data& wanted) {
-                   return std::binary_search(listed.begin(), listed.end(), wanted);
-               });
+        const std::vector<base::Data> listed = hashesIn(decoded);
+        return !hashes.empty() && std::all_of(hashes.begin(), hashes.end(), [&](const base::Data& wanted) {
+            return std::binary_search(listed.begin(), listed.end(), wanted);
+        });
     });
 }
 
@@ -163,7 +162,7 @@ std::optional<TicketRefusal> explain_ticket(ByteView ticket, trust::TrustService
     return genuine == nullptr ? explainRefusedTicket(ticket, service) : explainRevoked(ticket, genuine.get());
 }
 
-std::optional<TicketRefusal> explain_ticket(ByteView ticket, const std::optional<foundation::Data>& cdhash,
+std::optional<TicketRefusal> explain_ticket(ByteView ticket, const std::optional<base::Data>& cdhash,
                                             trust::TrustService& service) {
     const tm_ticket_ptr genuine = genuineTicket(ticket, service);
     if (genuine == nullptr) return explainRefusedTicket(ticket, service);
@@ -186,7 +185,7 @@ std::optional<TicketRefusal> explainCertificates(ByteView block, const satchel_c
         if (certificate == nullptr)
             return TicketRefusal{RefusalStep::certificates,
                                  static_cast<std::uint64_t>(survey.elements[i].data() - block.data()),
-                                 foundation::format("certificate %zu cannot be read", i + 1)};
+                                 values::format("certificate %zu cannot be read", i + 1)};
         if (certificates != nullptr) certificates->push_back(std::move(certificate));
     }
     if (!survey.fault) return std::nullopt;
@@ -202,7 +201,7 @@ std::string JudgedChain::reason() const {
 std::optional<std::size_t> JudgedChain::faultyCertificate(
     const std::vector<trust::CertificateRef>& certificates) const {
     if (evaluated == nullptr) return std::nullopt;
-    for (const foundation::Value& link : evaluated->properties()) {
+    for (const values::Value& link : evaluated->properties()) {
         const std::string* const title = link[trust::kPropertyTitle].string();
         const std::string* const error = link[trust::kPropertyError].string();
         if (title == nullptr || error == nullptr || error->empty() || !problem.ends_with(*error)) continue;
@@ -222,8 +221,8 @@ JudgedChain judgeTicketChain(const std::vector<trust::CertificateRef>& certifica
         return chain;
     }
     const auto object = service.makeTrust(certificates, policy);
-    const auto verdict = object && *object != nullptr ? (*object)->evaluate()
-                                                      : foundation::Error::osStatus(trust::kParameterError);
+    const auto verdict =
+        object && *object != nullptr ? (*object)->evaluate() : base::Error::osStatus(trust::kParameterError);
     if (!verdict) {
         chain.problem = "the chain could not be judged";
         return chain;

@@ -13,11 +13,11 @@
 #include <string>
 #include <vector>
 
+#include "base/bytes.h"
 #include "formats/disk_image.h"
 #include "formats/package_trailers.h"
 #include "formats/satchel.h"
 #include "formats/tm_ticket.h"
-#include "foundation/bytes.h"
 #include "trust/trust.h"
 
 namespace pinwell {
@@ -30,13 +30,12 @@ enum class TicketVerdict : std::uint8_t {
 
 /// Judges the bytes of a ticket. `hash` is called only for a ticket that is genuine and not revoked; without
 /// a hash the ticket is refused. From any thread.
-TicketVerdict judgeTicket(const std::optional<foundation::Data>& ticket,
-                          const std::function<std::optional<foundation::Data>()>& hash,
-                          trust::TrustService& trust);
+TicketVerdict judgeTicket(const std::optional<base::Data>& ticket,
+                          const std::function<std::optional<base::Data>()>& hash, trust::TrustService& trust);
 
 /// The same of a ticket that is to list each of these hashes. Without hashes it is refused.
-TicketVerdict judgeTicket(const std::optional<foundation::Data>& ticket,
-                          const std::vector<foundation::Data>& hashes, trust::TrustService& trust);
+TicketVerdict judgeTicket(const std::optional<base::Data>& ticket, const std::vector<base::Data>& hashes,
+                          trust::TrustService& trust);
 
 // Why a ticket is refused.
 
@@ -72,24 +71,23 @@ struct TicketRefusal {
 
 /// Why a ticket is refused by itself: it is not genuine (satchel_get_validated_tm_ticket refuses it), or it
 /// is marked as revoked. `nullopt` if it is neither.
-std::optional<TicketRefusal> explain_ticket(foundation::ByteView ticket, trust::TrustService& service);
+std::optional<TicketRefusal> explain_ticket(base::ByteView ticket, trust::TrustService& service);
 
 /// The same for the ticket of an artefact, which must list `cdhash` too. Pass `nullopt` for an artefact
 /// without a valid signature: every ticket is refused then.
-std::optional<TicketRefusal> explain_ticket(foundation::ByteView ticket,
-                                            const std::optional<foundation::Data>& cdhash,
+std::optional<TicketRefusal> explain_ticket(base::ByteView ticket, const std::optional<base::Data>& cdhash,
                                             trust::TrustService& service);
 
 /// The reason for a ticket that satchel_get_validated_tm_ticket has just refused. The step is `memory` if no
 /// rule is broken.
-TicketRefusal explainRefusedTicket(foundation::ByteView ticket, trust::TrustService& service);
+TicketRefusal explainRefusedTicket(base::ByteView ticket, trust::TrustService& service);
 
 // Two steps by themselves, to show them for a damaged ticket too.
 
 /// The first fault of a certificate block, whose survey is `survey`; `offset` counts from the start of
 /// `block`. A certificate that cannot be read comes before a fault of the framing after it. `certificates`,
 /// if not null, gets the certificates before the fault.
-std::optional<TicketRefusal> explainCertificates(foundation::ByteView block,
+std::optional<TicketRefusal> explainCertificates(base::ByteView block,
                                                  const satchel_certificate_block& survey,
                                                  trust::TrustService& service,
                                                  std::vector<trust::CertificateRef>* certificates = nullptr);

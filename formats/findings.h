@@ -11,7 +11,7 @@
 #include <type_traits>
 #include <utility>
 
-#include "foundation/format.h"
+#include "values/format.h"
 
 namespace pinwell {
 
@@ -42,8 +42,8 @@ class Diagnostics {
     explicit Diagnostics(Listener listener) : listener_(std::move(listener)) {}
 
     template <class... Args>
-    void note(foundation::FormatString<std::type_identity_t<Args>...> format, const Args&... args) const {
-        if (listener_) listener_(foundation::format(format, args...));
+    void note(values::FormatString<std::type_identity_t<Args>...> format, const Args&... args) const {
+        if (listener_) listener_(values::format(format, args...));
     }
 
   private:

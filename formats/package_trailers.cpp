@@ -7,20 +7,19 @@
 #include <utility>
 #include <vector>
 
+#include "base/byte_io.h"
 #include "formats/tm_ticket.h"
-#include "foundation/byte_reader.h"
-#include "foundation/byte_writer.h"
 
 namespace pinwell {
 namespace {
 
+using base::ByteReader;
+using base::ByteView;
+using base::Data;
+using base::SharedBytes;
+using base::SparseBuffer;
 using files::FileHandleError;
 using files::FileReader;
-using foundation::ByteReader;
-using foundation::ByteView;
-using foundation::Data;
-using foundation::SharedBytes;
-using foundation::SparseBuffer;
 
 constexpr std::string_view kTrailerMagic = "t8lr";
 
@@ -38,7 +37,7 @@ ByteReader recordFieldAt(const trailer_header& record, std::size_t offset) {
 }  // namespace
 
 std::string trailer_header::magic() const {
-    return foundation::toString(ByteView(bytes).first(kTrailerMagic.size()));
+    return base::toString(ByteView(bytes).first(kTrailerMagic.size()));
 }
 std::uint16_t trailer_header::version() const {
     return recordFieldAt(*this, kTrailerVersionOffset).le16("version");
@@ -54,7 +53,7 @@ std::uint64_t trailer_header::firstWord() const {
 }
 
 trailer_header ticketTrailer(std::uint32_t length) {
-    foundation::ByteWriter writer;
+    base::ByteWriter writer;
     writer.text(kTrailerMagic).le16(kTrailerVersion).le16(kTicketTrailerType).le64(length);
     trailer_header record;
     std::copy(writer.data().begin(), writer.data().end(), record.bytes.begin());
@@ -291,7 +290,7 @@ class Walk {
     }
 
     SharedBytes readAt(std::uint64_t start, std::uint64_t length) {
-        if (length <= TrailerWindow::kSize) return foundation::toData(window_.readAt(start, length));
+        if (length <= TrailerWindow::kSize) return base::toData(window_.readAt(start, length));
         file_.seek(start);
         return files::readShared(file_, length);
     }
@@ -309,7 +308,7 @@ class Walk {
     void readTicket(std::uint64_t start, std::uint32_t length) {
         diagnostics_.note("Found expected ticket at %llu with length of %d", start, length);
         try {
-            found_.ticket = foundation::toData(readAt(start, heldOfTicket(length)).view());
+            found_.ticket = base::toData(readAt(start, heldOfTicket(length)).view());
             found_.ticketStart = start;
             found_.ticketLength = length;
         } catch (const FileHandleError& failure) {

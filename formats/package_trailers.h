@@ -23,10 +23,9 @@
 #include <optional>
 #include <string>
 
+#include "base/bytes.h"
 #include "files/file_reader.h"
 #include "formats/findings.h"
-#include "foundation/bytes.h"
-#include "foundation/sparse_bytes.h"
 
 namespace pinwell {
 
@@ -65,8 +64,7 @@ bool isWritableTicketLength(std::uint64_t length);
 
 /// Whether the bytes are a record with a known version and magic. A diagnostic line gives the reason if not.
 /// A non-null `record` gets the bytes of a valid record.
-bool trailer_data_is_valid(foundation::ByteView bytes, trailer_header* record,
-                           const Diagnostics& diagnostics = {});
+bool trailer_data_is_valid(base::ByteView bytes, trailer_header* record, const Diagnostics& diagnostics = {});
 
 /// Whether a valid record with these first 8 bytes and this length is the terminator. A diagnostic line gives
 /// the reason if not. Only the low 32 bits of the length are tested.
@@ -120,12 +118,12 @@ struct package_trailers {
 
     /// The ticket, as much as is held (tm_ticket.h), and its place in the file; both numbers are 0 if there
     /// is none.
-    std::optional<foundation::Data> ticket;
+    std::optional<base::Data> ticket;
     std::uint64_t ticketStart = 0;
     std::uint64_t ticketLength = 0;
 
     /// The unknown trailers after the ticket, in file order; `nullopt` if there are none.
-    std::optional<foundation::SharedBytes> dataToAppend;
+    std::optional<base::SharedBytes> dataToAppend;
 
     /// The fault that ended the walk, with its offset in the file.
     std::optional<ticket_fault> fault;

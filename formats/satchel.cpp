@@ -8,11 +8,11 @@
 #include <span>
 #include <utility>
 
+#include "base/byte_io.h"
+#include "base/error.h"
 #include "formats/satchel.h"
-#include "foundation/byte_reader.h"
-#include "foundation/error.h"
-#include "foundation/value.h"
 #include "trust/der.h"
+#include "values/value.h"
 
 namespace pinwell {
 namespace {
@@ -21,12 +21,12 @@ namespace der = trust::der;
 namespace option = trust::option;
 namespace status = satchel_status;
 
-using foundation::Array;
-using foundation::asBytes;
-using foundation::ByteReader;
-using foundation::ByteView;
-using foundation::Dictionary;
-using foundation::Value;
+using base::asBytes;
+using base::ByteReader;
+using base::ByteView;
+using values::Array;
+using values::Dictionary;
+using values::Value;
 
 // A caller's mistake, not a file's fault: no buffer can be there.
 bool wrapsAddressSpace(const std::byte* start, std::uint64_t length) {

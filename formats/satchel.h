@@ -39,10 +39,10 @@
 #include <string_view>
 #include <vector>
 
+#include "base/bytes.h"
 #include "formats/findings.h"
-#include "foundation/bytes.h"
-#include "foundation/value.h"
 #include "trust/trust.h"
+#include "values/value.h"
 
 namespace pinwell {
 
@@ -88,7 +88,7 @@ struct satchel_survey {
     /// `nullopt` if satchel_decode_header accepts the container.
     std::optional<ticket_fault> fault;
 };
-satchel_survey satchel_survey_container(foundation::ByteView container);
+satchel_survey satchel_survey_container(base::ByteView container);
 
 /// Reads the framing alone: the certificate block, the payload and the signature are located, not read.
 std::int32_t satchel_decode_header(const std::byte* container, std::uint64_t length, satchel_view* view);
@@ -147,7 +147,7 @@ trust::Status _satchel_verify(const satchel_view* view, trust::TrustService& ser
 
 /// The elements of the certificate block, as views of it, before the first that breaks a rule.
 struct satchel_certificate_block {
-    std::array<foundation::ByteView, kSatchelMaximumCertificates> elements;
+    std::array<base::ByteView, kSatchelMaximumCertificates> elements;
     std::size_t count = 0;
     trust::Status status = satchel_status::kSuccess;
     std::optional<ticket_fault> fault;  // if the status is not success
@@ -157,10 +157,10 @@ struct satchel_certificate_block {
         fault = ticket_fault{offset, rule};
     }
 };
-satchel_certificate_block satchel_survey_certificates(foundation::ByteView block);
+satchel_certificate_block satchel_survey_certificates(base::ByteView block);
 
 /// The certificates of the block, signer first; empty unless it succeeds.
-trust::Status _satchel_copy_certificates(foundation::ByteView block,
+trust::Status _satchel_copy_certificates(base::ByteView block,
                                          std::vector<trust::CertificateRef>* certificates,
                                          trust::TrustService& service);
 
@@ -170,8 +170,7 @@ trust::Status _satchel_create_cert_policy(trust::PolicyRef* policy, trust::Trust
 
 /// Adds a value under a key and keeps the old value: a list grows by the value, a single value and the new
 /// one become a list of two.
-trust::Status _satchel_fuse_option(foundation::Dictionary& options, std::string_view key,
-                                   foundation::Value value);
+trust::Status _satchel_fuse_option(values::Dictionary& options, std::string_view key, values::Value value);
 
 /// A trust object with verdict 4 (trusted, no user setting); null for any other
 /// verdict.
@@ -180,11 +179,11 @@ trust::Status _satchel_create_trust(const std::vector<trust::CertificateRef>& ce
                                     trust::TrustService& service);
 
 /// `signature` is the field of 72 bytes, padding included.
-trust::Status _satchel_validate_signature(const trust::PublicKey& key, foundation::ByteView signed_data,
-                                          foundation::ByteView signature, trust::TrustService& service);
+trust::Status _satchel_validate_signature(const trust::PublicKey& key, base::ByteView signed_data,
+                                          base::ByteView signature, trust::TrustService& service);
 
 /// Returns null unless both the identifier and the options are given. The name may be missing.
 trust::PolicyRef satchel_make_policy(const std::string* oid, const std::string* name,
-                                     const foundation::Dictionary* options);
+                                     const values::Dictionary* options);
 
 }  // namespace pinwell

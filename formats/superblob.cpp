@@ -5,17 +5,16 @@
 #include <limits>
 #include <utility>
 
-#include "foundation/byte_reader.h"
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 
 namespace pinwell {
 
-using foundation::ByteReader;
-using foundation::ByteView;
-using foundation::ByteWriter;
-using foundation::Data;
-using foundation::ShortRead;
-using foundation::SparseBuffer;
+using base::ByteReader;
+using base::ByteView;
+using base::ByteWriter;
+using base::Data;
+using base::ShortRead;
+using base::SparseBuffer;
 
 namespace {
 
@@ -173,11 +172,11 @@ std::optional<SurveyedBlob> surveyLastBlobOf(std::uint32_t slot, ByteView superb
     return last;
 }
 
-foundation::Value BlobRecord::at(std::string_view key) const {
+values::Value BlobRecord::at(std::string_view key) const {
     if (key == kSlotTypeKey) return slotType;
     if (key == kBlobOffsetKey) return offset;
     if (key == kBlobLengthKey) return length();
-    if (key == kBlobDataKey) return foundation::toData(data);
+    if (key == kBlobDataKey) return base::toData(data);
     if (key == kBlobMagicKey) return magic;
     return {};
 }

@@ -27,11 +27,10 @@
 #include <string_view>
 #include <vector>
 
+#include "base/byte_io.h"
+#include "base/bytes.h"
 #include "formats/findings.h"
-#include "foundation/byte_reader.h"
-#include "foundation/bytes.h"
-#include "foundation/sparse_bytes.h"
-#include "foundation/value.h"
+#include "values/value.h"
 
 namespace pinwell {
 
@@ -83,10 +82,10 @@ struct BlobHeader {
     std::uint32_t length = 0;
 };
 
-// Each reads at the reader's position, and throws foundation::ShortRead, which names the field.
-SuperblobHeader readSuperblobHeader(foundation::ByteReader& reader);
-BlobIndexEntry readBlobIndexEntry(foundation::ByteReader& reader);
-BlobHeader readBlobHeader(foundation::ByteReader& reader);
+// Each reads at the reader's position, and throws base::ShortRead, which names the field.
+SuperblobHeader readSuperblobHeader(base::ByteReader& reader);
+BlobIndexEntry readBlobIndexEntry(base::ByteReader& reader);
+BlobHeader readBlobHeader(base::ByteReader& reader);
 
 // The survey.
 
@@ -96,16 +95,16 @@ struct SurveyedBlob {
     std::uint32_t offset = 0;             // as stated
     std::optional<std::uint32_t> magic;   // `nullopt` if there is no blob header at the offset
     std::optional<std::uint32_t> length;  // as stated
-    foundation::ByteView bytes;           // from the offset, up to the stated length or the end
+    base::ByteView bytes;                 // from the offset, up to the stated length or the end
 };
 
 /// The entries of an index, despite faults in it or in the blobs. The first `maximum` entries; `count`
 /// becomes the header's count, or 0 without a header.
-std::vector<SurveyedBlob> surveySuperBlob(foundation::ByteView superblob, std::size_t maximum,
+std::vector<SurveyedBlob> surveySuperBlob(base::ByteView superblob, std::size_t maximum,
                                           std::uint32_t& count);
 
 /// The last entry for `slot` whose blob has a header, by the same rules; `nullopt` if there is none.
-std::optional<SurveyedBlob> surveyLastBlobOf(std::uint32_t slot, foundation::ByteView superblob);
+std::optional<SurveyedBlob> surveyLastBlobOf(std::uint32_t slot, base::ByteView superblob);
 
 // The blobs of a disk image's superblob.
 
@@ -121,12 +120,12 @@ struct BlobRecord {
     std::uint32_t slotType = 0;
     std::uint32_t offset = 0;
     std::uint32_t magic = 0;
-    foundation::ByteView data;  // with the blob's header
+    base::ByteView data;  // with the blob's header
 
     std::uint64_t length() const noexcept { return data.size(); }
 
     /// The value of one of the five keys; null for any other.
-    foundation::Value at(std::string_view key) const;
+    values::Value at(std::string_view key) const;
 
     /// Whether all keys have equal values.
     friend bool operator==(const BlobRecord& a, const BlobRecord& b);
@@ -138,20 +137,20 @@ using BlobSet = std::vector<BlobRecord>;
 /// The blobs of a whole superblob with a stated count of `numberOfBlobs`, as views of it. Returns `nullopt`
 /// if index entries are missing or equal, or if the blobs do not fill the superblob. Returns fewer than
 /// `numberOfBlobs` records if a blob's own length is wrong but the others still fill the superblob.
-std::optional<BlobSet> orderedBlobSetForSuperBlob(foundation::ByteView superblob, std::uint32_t numberOfBlobs,
+std::optional<BlobSet> orderedBlobSetForSuperBlob(base::ByteView superblob, std::uint32_t numberOfBlobs,
                                                   const Diagnostics& diagnostics = {});
 
 /// The superblob for a missing signature: a header with a count of 0.
-foundation::Data emptySuperblob();
+base::Data emptySuperblob();
 
 /// Whether the length of superblobWithTicket's result fits the 32 bits in its
 /// header.
-bool hasRoomForTicket(const BlobSet& blobs, foundation::ByteView ticket);
+bool hasRoomForTicket(const BlobSet& blobs, base::ByteView ticket);
 
 /// The superblob of all of `blobs` except tickets, then `ticket` in its own blob unless it is empty, then
 /// `spare` zero bytes for the caller to fill. Empty if no blob remains. hasRoomForTicket must hold. Throws
 /// std::bad_alloc.
-foundation::SparseBuffer superblobWithTicket(const BlobSet& blobs, foundation::ByteView ticket,
-                                             std::size_t spare = 0, const Diagnostics& diagnostics = {});
+base::SparseBuffer superblobWithTicket(const BlobSet& blobs, base::ByteView ticket, std::size_t spare = 0,
+                                       const Diagnostics& diagnostics = {});
 
 }  // namespace pinwell

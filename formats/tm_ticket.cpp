@@ -23,9 +23,9 @@
 #include <span>
 #include <utility>
 
+#include "base/byte_io.h"
+#include "base/bytes.h"
 #include "formats/satchel.h"
-#include "foundation/byte_reader.h"
-#include "foundation/bytes.h"
 
 namespace pinwell {
 
@@ -36,9 +36,9 @@ static_assert(sizeof(tm_ticket) == 1);
 
 namespace {
 
-using foundation::asBytes;
-using foundation::ByteReader;
-using foundation::ByteView;
+using base::asBytes;
+using base::ByteReader;
+using base::ByteView;
 
 constexpr std::uint16_t kVersionWithoutAlgorithms = 1;
 constexpr std::uint16_t kVersionWithAlgorithms = 2;

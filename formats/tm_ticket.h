@@ -31,8 +31,8 @@
 #include <optional>
 #include <string_view>
 
+#include "base/bytes.h"
 #include "formats/findings.h"
-#include "foundation/bytes.h"
 #include "trust/trust.h"
 
 namespace pinwell {
@@ -81,14 +81,14 @@ struct tm_ticket_survey {
     std::uint16_t version = 0;
     std::uint16_t hash_length = 0;
     std::uint64_t count = 0;
-    foundation::ByteView entries;  // part of the payload
+    base::ByteView entries;  // part of the payload
 
     /// `nullopt` if tm_ticket_decode accepts the payload.
     std::optional<ticket_fault> fault;
 
     std::uint64_t entry_size() const;
 };
-tm_ticket_survey tm_ticket_survey_payload(foundation::ByteView payload);
+tm_ticket_survey tm_ticket_survey_payload(base::ByteView payload);
 
 /// The entry at `index` of a survey, by the rules of tm_ticket_copy_cdhash.
 std::int32_t tm_ticket_survey_copy_cdhash(const tm_ticket_survey& survey, std::uint64_t index,
@@ -111,7 +111,7 @@ std::int32_t tm_ticket_copy_cdhash(const tm_ticket* ticket, std::uint64_t index,
 
 /// Whether one of the entries is this hash. Compares as many bytes as the entry's algorithm has, and not the
 /// algorithm's number. Skips entries that cannot be copied.
-bool tm_ticket_lists_cdhash(const tm_ticket* ticket, foundation::ByteView cdhash);
+bool tm_ticket_lists_cdhash(const tm_ticket* ticket, base::ByteView cdhash);
 
 /// Bytes of a code-directory hash by its algorithm, numbered as in code directories (codesign::DigestType):
 /// 20 for 0 to 3, 48 for 4; 0 if unknown.

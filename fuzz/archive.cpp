@@ -4,7 +4,7 @@
 #include <algorithm>
 #include <cstring>
 
-#include "foundation/byte_reader.h"
+#include "base/byte_io.h"
 #include "scratch_file.h"
 #include "signed_data.h"
 #include "target.h"
@@ -18,7 +18,7 @@ Data computedChecksum(ByteView archive) {
     const auto header = xar::parseHeader(archive.first(std::min(archive.size(), xar::kLongestHeaderRead)));
     require(header.has_value(), "an archive has a header");
     if (!header->digest) return {};
-    foundation::ByteReader reader(archive);
+    base::ByteReader reader(archive);
     reader.skip(header->size, "header");
     return crypto::digestOf(*header->digest, reader.bytes(header->compressedLength, "table of contents"));
 }

@@ -1,9 +1,9 @@
 // The superblob of a disk image, split into its blobs and written again.
 #include <algorithm>
 
+#include "base/byte_io.h"
 #include "codesign/code_signing.h"
 #include "formats/superblob.h"
-#include "foundation/byte_reader.h"
 #include "src/messages.h"
 #include "target.h"
 
@@ -17,7 +17,7 @@ struct Header {
 };
 
 Header headerOf(ByteView superblob) {
-    foundation::ByteReader reader(superblob);
+    base::ByteReader reader(superblob);
     Header header;
     header.magic = reader.be32("magic");
     header.length = reader.be32("length");
@@ -30,7 +30,7 @@ bool isTicket(const BlobRecord& record) {
 }
 
 Data superblobOf(const BlobSet& blobs, ByteView ticket) {
-    return foundation::toData(superblobWithTicket(blobs, ticket, 0, noisyDiagnostics()).view());
+    return base::toData(superblobWithTicket(blobs, ticket, 0, noisyDiagnostics()).view());
 }
 
 }  // namespace
@@ -55,7 +55,7 @@ void examine(ByteView input) {
     if (isOurs && !blobs->empty() && std::ranges::none_of(*blobs, isTicket))
         require(std::ranges::equal(rebuilt, input), "what is taken apart goes together again");
 
-    const Data ticket = foundation::toData("ticket");
+    const Data ticket = base::toData("ticket");
     const Data stapled = superblobOf(*blobs, ticket);
     const auto again = orderedBlobSetForSuperBlob(stapled, headerOf(stapled).count, noisyDiagnostics());
     require(again && std::ranges::count_if(*again, isTicket) == 1, "there is one ticket afterwards");

@@ -196,7 +196,7 @@ void examine(ByteView input) {
     if (choice == kPlaces.size()) return examineRoots(rest);
     if (choice > kPlaces.size()) return examineRecordName(rest);
     const Place& place = kPlaces[choice];
-    const std::string contents = foundation::toString(rest);
+    const std::string contents = base::toString(rest);
     const Replaced replaced(folder() / place.file, contents);
     const std::string path = folder() / place.artefact;
     const pinwell_verdict judged = examineResult(pinwell_judge_file, path);

@@ -14,8 +14,8 @@ namespace der = trust::der;
 
 std::unique_ptr<trust::TrustService> serviceWithoutAnchors() {
     return trust::makeTrustService(
-        foundation::PlatformDirectory("/nowhere"), [](std::string_view) {},
-        [] { return foundation::Date{1795204500}; });
+        config::PlatformDirectory("/nowhere"), [](std::string_view) {},
+        [] { return values::Date{1795204500}; });
 }
 
 // The number of consecutive elements, and whether they fill the bytes.

@@ -3,9 +3,9 @@
 
 #include <algorithm>
 
+#include "base/byte_io.h"
 #include "codesign/code_error.h"
 #include "codesign/superblob.h"
-#include "foundation/byte_reader.h"
 #include "target.h"
 
 namespace pinwell::fuzz {
@@ -24,7 +24,7 @@ void examineBlobs(ByteView superblob) {
     std::vector<std::pair<std::uint32_t, Data>> list;
     for (const auto& blob : blobs) {
         require(liesWithin(blob.bytes, superblob), "a blob lies within the superblob");
-        list.emplace_back(blob.slot, foundation::toData(blob.bytes));
+        list.emplace_back(blob.slot, base::toData(blob.bytes));
     }
     const Data rebuilt = codesign::buildSuperBlob(list);
     const auto again = codesign::parseSuperBlob(rebuilt);
@@ -35,7 +35,7 @@ void examineBlobs(ByteView superblob) {
 }
 
 void examineDirectory(ByteView bytes) {
-    const auto directory = codesign::CodeDirectory::parse(foundation::toData(bytes));
+    const auto directory = codesign::CodeDirectory::parse(base::toData(bytes));
     require(std::ranges::equal(directory.bytes(), bytes), "a code directory keeps its bytes");
     const std::size_t size = codesign::digestSize(directory.digestType());
     for (std::uint32_t slot = 0; slot <= 16; ++slot) {
@@ -48,8 +48,7 @@ void examineDirectory(ByteView bytes) {
 }
 
 void examineSignature(ByteView superblob) {
-    const auto signature =
-        CodeSignature::parse(codesign::componentsOfSuperBlob(foundation::toData(superblob)));
+    const auto signature = CodeSignature::parse(codesign::componentsOfSuperBlob(base::toData(superblob)));
     if (!signature) return;
     const auto information = signature->information(codesign::kSigningInformation);
     require(information.unique && information.cdHashes.front() == *information.unique,
@@ -65,7 +64,7 @@ void attempt(Step step) {
     try {
         step();
     } catch (const CodeError&) {
-    } catch (const foundation::ShortRead&) {
+    } catch (const base::ShortRead&) {
     }
 }
 

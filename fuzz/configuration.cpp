@@ -3,8 +3,8 @@
 #include <algorithm>
 #include <cstdlib>
 
+#include "config/platform_directory.h"
 #include "defaults/user_defaults.h"
-#include "foundation/platform_directory.h"
 #include "support/certificate_builder.h"
 #include "support/temporary_directory.h"
 #include "target.h"
@@ -22,7 +22,7 @@ struct Scene {
     Data leaf = test::TicketChain().issue().leaf.der;
 };
 
-void examineHost(const foundation::PlatformDirectory& directory) {
+void examineHost(const config::PlatformDirectory& directory) {
     const auto host = directory.lumoraHost();
     if (!host) {
         require(!host.error().localizedDescription().empty(), "a refusal says why");
@@ -42,9 +42,9 @@ void examineDefaults() {
     static_cast<void>(domain->boolForKey("flag"));
 }
 
-void examineRoots(const foundation::PlatformDirectory& directory, ByteView leaf) {
+void examineRoots(const config::PlatformDirectory& directory, ByteView leaf) {
     const auto service = trust::makeTrustService(
-        directory, [](std::string_view) {}, [] { return foundation::Date{1795204500}; });
+        directory, [](std::string_view) {}, [] { return values::Date{1795204500}; });
     const auto certificate = service->parseCertificate(leaf);
     auto policy = std::make_shared<trust::Policy>();
     policy->options.emplace(trust::option::kIdLinkage, true);
@@ -62,7 +62,7 @@ void examine(ByteView input) {
     test::writeFile(scene.directory / "platform.json", input);
     test::writeFile(scene.directory / "domain.json", input);
     test::writeFile(scene.directory / "roots/root.pem", input);
-    const foundation::PlatformDirectory directory(scene.directory.path());
+    const config::PlatformDirectory directory(scene.directory.path());
     examineHost(directory);
     examineDefaults();
     examineRoots(directory, scene.leaf);

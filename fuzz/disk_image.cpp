@@ -31,7 +31,7 @@ void examineLayout(const PWHashedDiskImage& image, ByteView input) {
 }
 
 void examineStapling(Scene& scene, PWHashedDiskImage& image, ByteView input) {
-    const Data ticket = foundation::toData("a new ticket");
+    const Data ticket = base::toData("a new ticket");
     const auto source = scene.platform.directory.url("ticket");
     const auto target = scene.platform.directory.url("Sample.dmg");
     test::writeFile(source.path(), ByteView(ticket));
@@ -44,7 +44,7 @@ void examineStapling(Scene& scene, PWHashedDiskImage& image, ByteView input) {
     require(found && *found == ticket, "a stapled ticket reads back");
     require(stapled.endOfDMGData() == image.endOfDMGData(), "the data end where they did");
     const std::string after = test::readFile(target.path());
-    require(std::ranges::equal(foundation::asBytes(after).first(image.endOfDMGData()),
+    require(std::ranges::equal(base::asBytes(after).first(image.endOfDMGData()),
                                input.first(image.endOfDMGData())),
             "the data are what they were");
 }

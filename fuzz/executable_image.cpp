@@ -3,10 +3,10 @@
 
 #include <algorithm>
 
+#include "base/byte_io.h"
 #include "codesign/code_error.h"
 #include "codesign/code_signature.h"
 #include "codesign/superblob.h"
-#include "foundation/byte_reader.h"
 #include "target.h"
 
 namespace pinwell::fuzz {
@@ -24,7 +24,7 @@ void examineSlice(const codesign::ByteSource& source, const codesign::ImageSlice
     const auto range = codesign::findImageSignature(source, slice);
     if (!range) return;
     require(liesWithin(*range, slice.range), "a signature lies within its slice");
-    const foundation::SharedBytes superblob = codesign::readSuperBlob(source, range->offset, range->length);
+    const base::SharedBytes superblob = codesign::readSuperBlob(source, range->offset, range->length);
     require(superblob.size() <= range->length, "a superblob lies within its area");
     const auto signature = codesign::CodeSignature::parse(codesign::componentsOfSuperBlob(superblob));
     if (signature) signature->requireValid();
@@ -33,7 +33,7 @@ void examineSlice(const codesign::ByteSource& source, const codesign::ImageSlice
 }  // namespace
 
 void examine(ByteView input) {
-    const codesign::MemorySource source(foundation::toData(input));
+    const codesign::MemorySource source(base::toData(input));
     try {
         const bool isImage = codesign::isExecutableImage(source);
         const auto slices = codesign::readSlices(source);
@@ -47,7 +47,7 @@ void examine(ByteView input) {
             try {
                 examineSlice(source, slice);
             } catch (const codesign::CodeError&) {
-            } catch (const foundation::ShortRead&) {
+            } catch (const base::ShortRead&) {
             }
         }
     } catch (const codesign::CodeError&) {

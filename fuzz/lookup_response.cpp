@@ -22,7 +22,7 @@ bool isAnOutcome(int status) {
 std::optional<int> finish(ControllerRun& run, std::uint8_t operation, ByteView answer) {
     run.controller.setOperation(operation);
     require(run.controller.grabTicket(), "the lookup is under way");
-    const auto status = run.answer(foundation::toString(answer));
+    const auto status = run.answer(base::toString(answer));
     const auto& sessions = run.platform.https.sessions;
     require(status.has_value() || sessions.size() > 1, "an answer ends the run, or begins a download");
     require(!status || isAnOutcome(*status), "a run ends with one of its exit codes");
@@ -38,7 +38,7 @@ void examine(ByteView input) {
         const Data ticket = test::unsignedTicket({ControllerRun::fileHash()});
         run.staple(ticket);
         finish(run, kOperationValidate, input);
-        require(test::readFile(run.stapledPath()) == foundation::toString(ticket),
+        require(test::readFile(run.stapledPath()) == base::toString(ticket),
                 "validating leaves the artefact alone");
     }
     ControllerRun run;

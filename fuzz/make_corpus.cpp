@@ -6,8 +6,7 @@
 #include <exception>
 #include <string>
 
-#include "foundation/byte_writer.h"
-#include "foundation/property_list.h"
+#include "base/byte_io.h"
 #include "support/archive_builder.h"
 #include "support/certificate_builder.h"
 #include "support/cms_signer.h"
@@ -19,12 +18,13 @@
 #include "support/tabled_image_builder.h"
 #include "support/temporary_directory.h"
 #include "support/ticket_builder.h"
+#include "values/property_list.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::asBytes;
-using foundation::toData;
+using base::asBytes;
+using base::toData;
 
 /// The seeds of one target.
 class Seeds {
@@ -63,7 +63,7 @@ void makeTickets(const std::string& corpus) {
 
 Data certificateBlock(const std::vector<Data>& certificates) {
     Data contents;
-    for (const Data& certificate : certificates) foundation::append(contents, certificate);
+    for (const Data& certificate : certificates) base::append(contents, certificate);
     return derElement(0x30, contents);
 }
 
@@ -140,7 +140,7 @@ void makeCodeSignatures(const std::string& corpus) {
 void makeMessages(const std::string& corpus) {
     const Data content = toData("a code directory");
     const auto seed = [&](const CmsBuilder& builder) {
-        return foundation::ByteWriter()
+        return base::ByteWriter()
             .u8(static_cast<std::uint8_t>(content.size()))
             .bytes(content)
             .bytes(builder.build())
@@ -218,8 +218,8 @@ Data binaryPropertyList() {
                                               "\x33" + std::string(8, '\x41'),
                                               "\x61\x20\xAC",
                                               "\x5F\x10\x01z"};
-    foundation::ByteWriter writer;
-    foundation::ByteWriter offsets;
+    base::ByteWriter writer;
+    base::ByteWriter offsets;
     writer.text("bplist00");
     for (const std::string& object : objects) {
         offsets.u8(static_cast<std::uint8_t>(writer.size()));
@@ -231,8 +231,8 @@ Data binaryPropertyList() {
 }
 
 void makeDocuments(const std::string& corpus) {
-    using foundation::Array;
-    using foundation::Dictionary;
+    using values::Array;
+    using values::Dictionary;
     const Dictionary dictionary{{"CFBundleExecutable", "Sample"},
                                 {"array", Array{1, -1, true, 0.5}},
                                 {"data", toData("data")},
@@ -240,7 +240,7 @@ void makeDocuments(const std::string& corpus) {
                                 {"text", "<&>\u00E9"}};
     const Data binary = binaryPropertyList();
     Seeds(corpus, "property_list")
-        .add("xml", *foundation::serializePropertyList(dictionary))
+        .add("xml", *values::serializePropertyList(dictionary))
         .add("kinds",
              "<plist><array><date>2026-11-20T19:55:00Z</date><integer>0x10</integer><real>1e3</real>"
              "<string>&#65;<![CDATA[<]]></string><dict><key>CF$UID</key><integer>1</integer></dict>"
@@ -300,7 +300,7 @@ void makeVerifiedDiskImages(const std::string& corpus) {
         .add("image_unsigned", image("Unsigned.dmg"));
     const Data some(2048, std::byte{0x5A});
     const auto table = [](const TabledImageBuilder& builder) {
-        return foundation::ByteWriter()
+        return base::ByteWriter()
             .u8(1)
             .be16(static_cast<std::uint16_t>(builder.table().size()))
             .bytes(builder.table())
@@ -371,12 +371,12 @@ void makeFilesOfArtefacts(const std::string& corpus) {
     add("image", 0, readFile(artefacts + "Sample.dmg"));
     add("image_unsigned", 0, readFile(artefacts + "bare/Unsigned.dmg"));
     add("package", 1, readFile(artefacts + "Sample.pkg"));
-    add("executable", 2, foundation::toString(ExecutableImageBuilder().build()));
+    add("executable", 2, base::toString(ExecutableImageBuilder().build()));
     add("ticket", 3, readFile(artefacts + "Sample.app/Contents/CodeResources"));
     add("ticket_revoked", 3, readFile(VECTORS_DIRECTORY "/tickets/revoked-app.ticket"));
     add("seal", 4, readFile(artefacts + "Sample.app/Contents/_CodeSignature/CodeResources"));
     add("property_list", 5, readFile(artefacts + "Sample.app/Contents/Info.plist"));
-    add("main_executable", 6, foundation::toString(ExecutableImageBuilder().build()));
+    add("main_executable", 6, base::toString(ExecutableImageBuilder().build()));
     add("roots", 7, readFile(VECTORS_DIRECTORY "/platform/roots/sample.pem"));
     add("record_name", 8, "\2\x90" + std::string(20, 'h'));
 }

@@ -19,7 +19,7 @@ std::size_t keptLength(const PWHashedFlatPackage& package) {
 }
 
 void examineWriting(test::TestPlatform& platform, ByteView before, PWHashedFlatPackage& package) {
-    const Data ticket = foundation::toData("a new ticket");
+    const Data ticket = base::toData("a new ticket");
     const auto source = platform.directory.url("ticket");
     const auto target = platform.directory.url("Sample.pkg");
     test::writeFile(source.path(), ByteView(ticket));
@@ -31,8 +31,7 @@ void examineWriting(test::TestPlatform& platform, ByteView before, PWHashedFlatP
     const auto found = stapled._ticketData();
     require(found && *found == ticket, "a stapled ticket reads back");
     const std::string after = test::readFile(target.path());
-    require(kept <= after.size() &&
-                std::ranges::equal(foundation::asBytes(after).first(kept), before.first(kept)),
+    require(kept <= after.size() && std::ranges::equal(base::asBytes(after).first(kept), before.first(kept)),
             "nothing before the ticket changes");
 }
 

@@ -1,17 +1,17 @@
 // A property list, in XML or in the binary form.
-#include "foundation/property_list.h"
+#include "values/property_list.h"
 
 #include <algorithm>
 
-#include "foundation/bytes.h"
-#include "foundation/description.h"
-#include "foundation/value.h"
+#include "base/bytes.h"
 #include "target.h"
+#include "values/format.h"
+#include "values/value.h"
 
 namespace pinwell::fuzz {
 namespace {
 
-using foundation::Value;
+using values::Value;
 
 // The number of values, and of levels.
 struct Extent {
@@ -33,17 +33,17 @@ void measure(const Value& value, unsigned depth, Extent& extent) {
 }  // namespace
 
 void examine(ByteView input) {
-    const auto value = foundation::parsePropertyList(input);
+    const auto value = values::parsePropertyList(input);
     if (!value) return;
     Extent extent;
     measure(*value, 0, extent);
-    require(extent.depth <= foundation::kMaximumPropertyListDepth, "nesting is bounded");
-    require(extent.values <= foundation::kMaximumPropertyListValues, "values are counted");
-    static_cast<void>(foundation::describe(*value));
+    require(extent.depth <= values::kMaximumPropertyListDepth, "nesting is bounded");
+    require(extent.values <= values::kMaximumPropertyListValues, "values are counted");
+    static_cast<void>(values::describe(*value));
 
-    const auto written = foundation::serializePropertyList(*value);
+    const auto written = values::serializePropertyList(*value);
     if (!written || extent.hasReals) return;
-    const auto again = foundation::parsePropertyList(*written);
+    const auto again = values::parsePropertyList(*written);
     require(again && *again == *value, "what is written reads as the same");
 }
 

@@ -3,7 +3,7 @@
 
 #include <string>
 
-#include "foundation/file_io.h"
+#include "base/handle.h"
 #include "target.h"
 
 namespace pinwell::fuzz {
@@ -16,7 +16,7 @@ class ScratchFile {
     const std::string& path() const noexcept { return path_; }
 
   private:
-    foundation::FileDescriptor file_;
+    base::FileDescriptor file_;
     std::string path_;
 };
 

@@ -20,7 +20,7 @@ inline Data signedDataOf(xar_signature_t signature) {
     const auto status = xar_signature_copy_signed_data(signature, &bytes, &length, nullptr, nullptr, nullptr);
     const std::unique_ptr<std::uint8_t, FreeMemory> owner(bytes);
     require(status == 0, "a signature signs something");
-    return foundation::toData(std::as_bytes(std::span(bytes, length)));
+    return base::toData(std::as_bytes(std::span(bytes, length)));
 }
 
 }  // namespace pinwell::fuzz

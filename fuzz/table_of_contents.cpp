@@ -48,7 +48,7 @@ void examine(ByteView input) {
                 whole->checksumStyle == pieced->checksumStyle,
             "how a document is cut does not change what it says");
 
-    const auto builder = test::ArchiveBuilder().toc(foundation::toString(input));
+    const auto builder = test::ArchiveBuilder().toc(base::toString(input));
     const ScratchFile file(builder.build());
     xar_t archive = xar_open(file.path().c_str(), 0);
     if (archive == nullptr) return;

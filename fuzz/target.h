@@ -5,12 +5,12 @@
 // change a result.
 #pragma once
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::fuzz {
 
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteView;
+using base::Data;
 
 /// The target: one for each program, defined in the file of its name.
 void examine(ByteView input);

@@ -1,9 +1,9 @@
 // A ticket container and its payload; the input is the container. A payload by itself is read as well.
 #include <algorithm>
 
+#include "base/byte_io.h"
 #include "formats/satchel.h"
 #include "formats/tm_ticket.h"
-#include "foundation/byte_writer.h"
 #include "support/fake_trust_service.h"
 #include "target.h"
 
@@ -12,7 +12,7 @@ namespace {
 
 // The payload of this decoded ticket, without the entries.
 Data encodedHeader(const tm_ticket* ticket, ByteView payload) {
-    foundation::ByteWriter writer;
+    base::ByteWriter writer;
     writer.text(kTicketMagic).le16(tm_ticket_get_version(ticket));
     writer.bytes(payload.subspan(6, 2));  // the hash length, which only the entries contain
     writer.le32(tm_ticket_get_cdhash_count(ticket)).le32(tm_ticket_get_flags(ticket));
@@ -55,7 +55,7 @@ void examinePayload(ByteView payload) {
 }
 
 void examineView(const satchel_view& view, ByteView container) {
-    foundation::ByteWriter writer;
+    base::ByteWriter writer;
     writer.text(kSatchelMagic).le16(view.version).bytes(container.subspan(6, 2));
     writer.le32(static_cast<std::uint32_t>(view.certificates_length));
     writer.le32(static_cast<std::uint32_t>(view.payload_length));

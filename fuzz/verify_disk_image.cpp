@@ -7,8 +7,7 @@
 //      table in Base64 in a property list
 #include <algorithm>
 
-#include "foundation/byte_reader.h"
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 #include "support/tabled_image_builder.h"
 #include "verified_bytes.h"
 #include "verify/code.h"
@@ -17,7 +16,7 @@ namespace pinwell::fuzz {
 namespace {
 
 Data imageAround(ByteView input) {
-    foundation::ByteReader reader(input);
+    base::ByteReader reader(input);
     if (reader.remaining() < 2) return {};
     const std::size_t length = std::min<std::size_t>(reader.be16("length"), reader.remaining());
     const ByteView table = reader.bytes(length, "table");
@@ -27,7 +26,7 @@ Data imageAround(ByteView input) {
 
 /// A stapled ticket has its own signature, which is not checked here.
 bool mayHoldTicket(ByteView image) {
-    const Data slot = foundation::ByteWriter().be32(0x10002).data();
+    const Data slot = base::ByteWriter().be32(0x10002).data();
     return std::search(image.begin(), image.end(), slot.begin(), slot.end()) != image.end();
 }
 
@@ -37,7 +36,7 @@ void examine(ByteView input) {
     if (input.empty()) return;
     const bool isTable = input.front() == std::byte{1};
     const ByteView rest = input.subspan(1);
-    const Data image = isTable ? imageAround(rest) : foundation::toData(rest);
+    const Data image = isTable ? imageAround(rest) : base::toData(rest);
     examineVerified(image, verify::verifyDiskImage,
                     mayHoldTicket(image) ? Coverage::partial : Coverage::whole);
 }

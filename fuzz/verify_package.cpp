@@ -64,14 +64,14 @@ void examine(ByteView input) {
     if (input.empty()) return;
     const ByteView rest = input.subspan(1);
     if (input.front() != std::byte{1}) return examineVerified(rest, verify::verifyPackage, Coverage::partial);
-    const ByteView mark = foundation::asBytes("</xar>");
+    const ByteView mark = base::asBytes("</xar>");
     const auto found = std::find_end(rest.begin(), rest.end(), mark.begin(), mark.end());
     const std::size_t length =
         found == rest.end() ? rest.size() : static_cast<std::size_t>(found - rest.begin()) + mark.size();
     examineTable(rest.first(length));
     examineVerified(test::ArchiveBuilder()
-                        .toc(foundation::toString(rest.first(length)))
-                        .afterChecksum(foundation::toData(rest.subspan(length)))
+                        .toc(base::toString(rest.first(length)))
+                        .afterChecksum(base::toData(rest.subspan(length)))
                         .build(),
                     verify::verifyPackage, Coverage::partial);
 }

@@ -60,7 +60,7 @@ void examineRequirement(std::string_view text) {
 
 void examine(ByteView input) {
     constexpr std::size_t kLongestRequirement = 4096;
-    const std::string text = foundation::toString(input);
+    const std::string text = base::toString(input);
     if (text.size() <= kLongestRequirement) examineRequirement(text);
     const std::optional<Seal> seal = parsed(input);
     if (!seal) return;

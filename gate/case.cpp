@@ -2,22 +2,22 @@
 
 #include <utility>
 
+#include "base/bytes.h"
+#include "base/places.h"
 #include "codesign/byte_source.h"
 #include "codesign/code_error.h"
-#include "foundation/bytes.h"
-#include "foundation/format.h"
-#include "foundation/places.h"
-#include "foundation/url.h"
 #include "gate/policy.h"
 #include "src/ticket_record.h"
+#include "values/format.h"
+#include "values/url.h"
 #include "verify/check.h"
 #include "verify/page_digest.h"
 #include "verify/verify.h"
 
 namespace pinwell::gate {
 
-using foundation::format;
-using foundation::URL;
+using values::format;
+using values::URL;
 using verify::JudgedTicket;
 using verify::Kind;
 using verify::Outcome;
@@ -86,7 +86,7 @@ bool Case::judgeStapled() {
         result_.digestType = file_->digestAlgorithm();
         result_.recordName = recordNameForHash(result_.digestType, *codeHash_);
     }
-    const std::optional<foundation::Data> bytes = file_->ticketData();
+    const std::optional<base::Data> bytes = file_->ticketData();
     if (!bytes || placeFault_) return false;
     result_.checks.pass(verify::kTicketStapled, kStapledPlace, "a ticket");
     stapled_.emplace(*bytes, judgement_.platform.trust);
@@ -131,9 +131,9 @@ void Case::verifyBytes() {
 // The verified file, unless somebody changes it meanwhile.
 void Case::digestFile() {
     try {
-        const codesign::FileSource file(foundation::Places(), absolutePath_);
+        const codesign::FileSource file(base::Places(), absolutePath_);
         result_.fileDigest =
-            foundation::toData(verify::digestOf(verify::Algorithm::sha256, file, {0, file.size()}));
+            base::toData(verify::digestOf(verify::Algorithm::sha256, file, {0, file.size()}));
     } catch (const codesign::CodeError& error) {
         unreadable(std::string("The file cannot be read: ") + error.what() + ".");
     }
@@ -177,7 +177,7 @@ void Case::takeFetched(const retrieval::FetchedTicket& fetched) {
     }
 }
 
-void Case::takeCurrent(foundation::ByteView bytes, const std::string& place) {
+void Case::takeCurrent(base::ByteView bytes, const std::string& place) {
     current_.emplace(bytes, judgement_.platform.trust);
     const bool isAcceptable = checkTicket(*current_, codeHash_, place, result_.checks);
     if (isAcceptable) {
@@ -192,7 +192,7 @@ void Case::takeCurrent(foundation::ByteView bytes, const std::string& place) {
 // Checks that the ticket, or the seal of listed code, vouches for each piece of code.
 void Case::checkListing() {
     if (!isStapledAcceptable_ || judgement_.options.isShallow) return;
-    const auto lists = [&](foundation::ByteView hash) {
+    const auto lists = [&](base::ByteView hash) {
         return stapled_->lists(hash) || (current_ && current_->lists(hash));
     };
     if (!verify::checkListing(code_, lists, result_.checks))

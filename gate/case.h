@@ -10,8 +10,8 @@
 #include <optional>
 #include <string>
 
+#include "base/bytes.h"
 #include "formats/explain_ticket.h"
-#include "foundation/bytes.h"
 #include "gate/run.h"
 #include "retrieval/ticket_fetch.h"
 #include "src/PWHashedFile/PWHashedFile.h"
@@ -58,7 +58,7 @@ class Case {
     void verifyBytes();
     void digestFile();
     void lookInDirectory();
-    void takeCurrent(foundation::ByteView bytes, const std::string& place);
+    void takeCurrent(base::ByteView bytes, const std::string& place);
     void checkListing();
     void checkPolicy();
     void atLeast(Verdict verdict, std::string conclusion);
@@ -69,7 +69,7 @@ class Case {
     std::shared_ptr<PWHashedFile> file_;
     verify::Kind kind_ = verify::Kind::bundle;
     std::string absolutePath_;
-    std::optional<foundation::Data> codeHash_;
+    std::optional<base::Data> codeHash_;
     std::optional<TicketPlaceFault> placeFault_;
     std::optional<verify::JudgedTicket> stapled_;
     std::optional<verify::JudgedTicket> current_;  // from the service, or from the directory

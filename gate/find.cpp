@@ -4,13 +4,13 @@
 #include <filesystem>
 #include <system_error>
 
+#include "base/places.h"
 #include "codesign/byte_source.h"
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
-#include "foundation/format.h"
-#include "foundation/places.h"
-#include "foundation/url.h"
 #include "src/PWHashedFile/file_kind.h"
+#include "values/format.h"
+#include "values/url.h"
 
 namespace pinwell::gate {
 
@@ -20,7 +20,7 @@ namespace fs = std::filesystem;
 
 bool beginsAsExecutable(const std::string& path) {
     try {
-        return codesign::isExecutableImage(codesign::FileSource(foundation::Places(), path));
+        return codesign::isExecutableImage(codesign::FileSource(base::Places(), path));
     } catch (const codesign::CodeError&) {
         return false;
     }
@@ -47,7 +47,7 @@ class Tree {
 
   private:
     bool isArtefact(const std::string& path, bool isDirectory) const {
-        const foundation::URL url = foundation::URL::fileURLWithPath(path);
+        const values::URL url = values::URL::fileURLWithPath(path);
         const auto properties = platform_.files.resourceProperties(url);
         if (!properties) return false;
         switch (assessmentClassForUTI(platform_.types, properties->typeIdentifier, url.pathExtension())) {

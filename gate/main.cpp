@@ -11,14 +11,14 @@
 #include <string>
 #include <vector>
 
+#include "base/error.h"
 #include "companion/command_line.h"
-#include "foundation/error.h"
-#include "foundation/process.h"
 #include "gate/find.h"
 #include "gate/policy.h"
 #include "gate/render.h"
 #include "gate/report_file.h"
 #include "gate/run.h"
+#include "runtime/process.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"
@@ -42,8 +42,8 @@ struct PolicyArguments {
     std::vector<std::string> identifiers;
     bool requiresSecureTimestamp = false;
 
-    foundation::Result<Policy> combined() const {
-        foundation::Result<Policy> policy = file.empty() ? Policy() : readPolicyFile(file);
+    base::Result<Policy> combined() const {
+        base::Result<Policy> policy = file.empty() ? Policy() : readPolicyFile(file);
         if (!policy) return policy;
         if (!maximumTicketAge.empty()) policy->maximumTicketAge = ageFrom(maximumTicketAge);
         if (!teams.empty()) policy->teams = teams;
@@ -190,7 +190,7 @@ bool isArtefact(const ReportFile& file, const std::vector<std::string>& paths) {
 
 int writeReports(const Options& options, const std::vector<Result>& results, ReportFile& report,
                  ReportFile& attestation) {
-    foundation::Result<void> written = report.write(render(options.format, results));
+    base::Result<void> written = report.write(render(options.format, results));
     if (written && !options.attestation.empty()) {
         const auto now = std::chrono::system_clock::now().time_since_epoch();
         const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(now).count();
@@ -213,7 +213,7 @@ int gate(const Options& options) {
 
     std::optional<TicketDirectory> tickets;
     if (options.tickets == Options::Tickets::directory) {
-        foundation::Result<TicketDirectory> opened = TicketDirectory::open(options.ticketDirectory);
+        base::Result<TicketDirectory> opened = TicketDirectory::open(options.ticketDirectory);
         if (!opened) {
             complain("cannot read the tickets: " + opened.error().localizedFailureReason());
             return EX_NOINPUT;
@@ -244,7 +244,7 @@ int run(int argc, char** argv) {
         return EX_USAGE;
     }
     if (options.output == "-") options.output.clear();
-    foundation::Result<Policy> combined = policy.combined();
+    base::Result<Policy> combined = policy.combined();
     if (!combined) {
         complain(combined.error().localizedFailureReason());
         return EX_CONFIG;
@@ -256,7 +256,7 @@ int run(int argc, char** argv) {
 }  // namespace
 
 int main(int argc, char** argv) {
-    foundation::occupyStandardStreams();
+    runtime::occupyStandardStreams();
     // A closed pipe becomes a failed write.
     std::signal(SIGPIPE, SIG_IGN);
     try {

@@ -10,16 +10,16 @@
 #include <functional>
 #include <limits>
 
-#include "foundation/bytes.h"
-#include "foundation/date.h"
-#include "foundation/file_io.h"
-#include "foundation/format.h"
-#include "foundation/toml_keys.h"
+#include "base/bytes.h"
+#include "base/file_io.h"
+#include "values/date.h"
+#include "values/format.h"
+#include "values/toml_keys.h"
 #include "verify/check.h"
 
 namespace pinwell::gate {
 
-using foundation::format;
+using values::format;
 using verify::CodeIdentity;
 
 namespace {
@@ -55,7 +55,7 @@ std::string listed(const std::vector<std::string>& texts) {
 std::string dateOf(std::int64_t seconds) {
     constexpr std::int64_t kEndOfYear9999 = 253'402'300'799;
     if (seconds < 0 || seconds > kEndOfYear9999) return format("%lld seconds after 1970", seconds);
-    return foundation::toString(foundation::Date{seconds});
+    return values::describe(values::Date{seconds});
 }
 
 bool checkAge(std::int64_t most, const verify::JudgedTicket* ticket, std::int64_t now,
@@ -100,13 +100,13 @@ bool checkOwnCode(std::string_view name, const std::string& wanted, const verify
     return isSatisfied;
 }
 
-foundation::Error malformed(const std::string& fault) {
-    return {foundation::kDataErrorDomain, foundation::kMalformedDocument, fault};
+base::Error malformed(const std::string& fault) {
+    return {base::kDataErrorDomain, base::kMalformedDocument, fault};
 }
 
 /// Leaves the reader at the first fault.
 struct PolicyFault {
-    foundation::Error error;
+    base::Error error;
 };
 
 /// Parts of a dotted key; our keys have only one.
@@ -205,12 +205,12 @@ bool matchesGlob(std::string_view glob, std::string_view text) {
     return glob.find_first_not_of('*', in) == std::string_view::npos;
 }
 
-foundation::Result<Policy> readPolicyFile(const std::string& path) {
-    const foundation::Result<foundation::Data> document = foundation::readSmallFile(path, kMaximumPolicyFile);
-    if (!document) return malformed(format("%@: %@", path, foundation::whyUnreadable(document.error())));
+base::Result<Policy> readPolicyFile(const std::string& path) {
+    const base::Result<base::Data> document = base::readSmallFile(path, kMaximumPolicyFile);
+    if (!document) return malformed(format("%@: %@", path, base::whyUnreadable(document.error())));
     PolicyReader reader(path);
-    const std::string text = foundation::toString(*document);
-    if (const auto line = foundation::lineOfLongTomlKey(text, kMaximumKeyParts))
+    const std::string text = base::toString(*document);
+    if (const auto line = values::lineOfLongTomlKey(text, kMaximumKeyParts))
         return malformed(format("%@:%u: a key of more than %u parts", path, *line, kMaximumKeyParts));
     const toml::parse_result parsed = toml::parse(std::string_view(text), path);
     try {

@@ -15,7 +15,7 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/error.h"
+#include "base/error.h"
 #include "gate/run.h"
 #include "verify/code.h"
 #include "verify/judged_ticket.h"
@@ -34,7 +34,7 @@ bool matchesGlob(std::string_view glob, std::string_view text);
 
 /// Returns an error if the file cannot be read, is not TOML, or has an unknown key or value. Its reason is
 /// "FILE:LINE: fault", or "FILE: fault" if no line has it.
-foundation::Result<Policy> readPolicyFile(const std::string& path);
+base::Result<Policy> readPolicyFile(const std::string& path);
 
 /// Adds a check for each requirement of the policy. `deciding`: the ticket whose age counts; null without a
 /// genuine ticket. Every slice of the artefact's own code must satisfy the policy; nested code need not.

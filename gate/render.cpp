@@ -1,11 +1,12 @@
 // Chooses the format of a report, and writes it as text.
 #include "gate/render.h"
 
-#include "foundation/format.h"
+#include "base/text.h"
+#include "values/format.h"
 
 namespace pinwell::gate {
 
-using foundation::escapeForTerminal;
+using base::escapeForTerminal;
 using verify::Check;
 using verify::Outcome;
 

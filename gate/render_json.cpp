@@ -3,10 +3,11 @@
 #include <nlohmann/json.hpp>
 #include <set>
 
-#include "foundation/date.h"
-#include "foundation/format.h"
-#include "foundation/url.h"
+#include "base/text.h"
 #include "gate/render.h"
+#include "values/date.h"
+#include "values/format.h"
+#include "values/url.h"
 
 namespace pinwell::gate {
 
@@ -90,7 +91,7 @@ OrderedJson resultOf(const Result& result, const Check& check) {
 std::string timestampOf(std::int64_t time) {
     constexpr std::size_t kDateLength = 10;
     constexpr std::size_t kLength = 19;
-    std::string text = foundation::toString(foundation::Date{time});
+    std::string text = values::describe(values::Date{time});
     text.resize(kLength);
     text[kDateLength] = 'T';
     return text + "Z";
@@ -98,21 +99,20 @@ std::string timestampOf(std::int64_t time) {
 
 /// The field takes only URIs, so a path is made absolute with the working directory.
 std::string absoluteUriOf(const std::string& path) {
-    return uriOf(foundation::URL::fileURLWithPath(path).path());
+    return uriOf(values::URL::fileURLWithPath(path).path());
 }
 
 /// The identity of the artefact: the digest of a file, and the hash in a ticket.
 OrderedJson subjectOf(const Result& result) {
     OrderedJson digests = OrderedJson::object();
-    if (!result.fileDigest.empty()) digests["sha256"] = foundation::toHex(result.fileDigest);
-    if (!result.codeHash.empty()) digests["cdhash"] = foundation::toHex(result.codeHash);
+    if (!result.fileDigest.empty()) digests["sha256"] = base::toHex(result.fileDigest);
+    if (!result.codeHash.empty()) digests["cdhash"] = base::toHex(result.codeHash);
     return {{"name", result.path}, {"digest", std::move(digests)}};
 }
 
 OrderedJson policyOf(const Policy& policy) {
     OrderedJson json = OrderedJson::object();
-    if (policy.maximumTicketAge)
-        json["max-ticket-age"] = foundation::format("%llds", *policy.maximumTicketAge);
+    if (policy.maximumTicketAge) json["max-ticket-age"] = values::format("%llds", *policy.maximumTicketAge);
     if (!policy.teams.empty()) json["require-team"] = policy.teams;
     if (!policy.identifiers.empty()) json["require-identifier"] = policy.identifiers;
     json["require-secure-timestamp"] = policy.requiresSecureTimestamp;

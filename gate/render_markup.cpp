@@ -1,7 +1,7 @@
 // The reports in markup: JUnit XML and HTML.
-#include "foundation/format.h"
-#include "foundation/markup.h"
+#include "base/text.h"
 #include "gate/render.h"
+#include "values/format.h"
 
 namespace pinwell::gate {
 
@@ -61,10 +61,10 @@ std::string tableOf(const std::vector<Check>& checks, bool worthShowing) {
     for (const Check& check : checks) {
         if (isWorthShowing(check) != worthShowing) continue;
         const std::string outcome(verify::outcomeName(check.outcome));
-        rows += "<tr><td class=\"" + outcome + "\">" + outcome + "</td><td>" +
-                foundation::markupText(check.name) + "</td><td>" + foundation::markupText(check.place) +
-                "</td><td class=\"value\">" + foundation::markupText(check.expected) +
-                "</td><td class=\"value\">" + foundation::markupText(check.found) + "</td></tr>\n";
+        rows += "<tr><td class=\"" + outcome + "\">" + outcome + "</td><td>" + base::markupText(check.name) +
+                "</td><td>" + base::markupText(check.place) + "</td><td class=\"value\">" +
+                base::markupText(check.expected) + "</td><td class=\"value\">" +
+                base::markupText(check.found) + "</td></tr>\n";
     }
     if (rows.empty()) return {};
     return "<table>\n<thead><tr><th scope=\"col\">Outcome</th><th scope=\"col\">Check</th><th "
@@ -90,10 +90,10 @@ std::string classOf(Verdict verdict) {
 
 std::string sectionOf(const Result& result) {
     const std::vector<Check> checks = verify::flattened(result.checks);
-    std::string html =
-        "<section class=\"" + classOf(result.verdict) + "\">\n<h2>" + foundation::markupText(result.path) +
-        "</h2>\n<div><span class=\"verdict\">" + foundation::markupText(verdictName(result.verdict)) +
-        "</span>: " + foundation::markupText(result.conclusion) + "</div>\n" + tableOf(checks, true);
+    std::string html = "<section class=\"" + classOf(result.verdict) + "\">\n<h2>" +
+                       base::markupText(result.path) + "</h2>\n<div><span class=\"verdict\">" +
+                       base::markupText(verdictName(result.verdict)) +
+                       "</span>: " + base::markupText(result.conclusion) + "</div>\n" + tableOf(checks, true);
     const std::string rest = tableOf(checks, false);
     if (!rest.empty())
         html += "<details><summary>All that was as it should be</summary>\n" + rest + "</details>\n";
@@ -118,13 +118,13 @@ Counts countsOf(const std::vector<Check>& checks) {
 }
 
 std::string attributesOf(const Counts& counts) {
-    return foundation::format(" tests=\"%zu\" failures=\"%zu\" errors=\"%zu\" skipped=\"%zu\"", counts.tests,
-                              counts.failures, counts.errors, counts.skipped);
+    return values::format(" tests=\"%zu\" failures=\"%zu\" errors=\"%zu\" skipped=\"%zu\"", counts.tests,
+                          counts.failures, counts.errors, counts.skipped);
 }
 
 std::string bodyOf(const Check& check) {
-    const std::string found = foundation::markupText(check.found);
-    const std::string both = "expected: " + foundation::markupText(check.expected) + "\nfound: " + found;
+    const std::string found = base::markupText(check.found);
+    const std::string both = "expected: " + base::markupText(check.expected) + "\nfound: " + found;
     switch (check.outcome) {
         case Outcome::passed:
             return {};
@@ -142,8 +142,8 @@ std::string bodyOf(const Check& check) {
 
 std::string caseOf(const Result& result, const Check& check) {
     const std::string name = check.place.empty() ? check.name : check.name + ": " + check.place;
-    std::string line = "    <testcase classname=\"" + foundation::markupText(result.path) + "\" name=\"" +
-                       foundation::markupText(name) + "\"";
+    std::string line = "    <testcase classname=\"" + base::markupText(result.path) + "\" name=\"" +
+                       base::markupText(name) + "\"";
     const std::string body = bodyOf(check);
     return line + (body.empty() ? "/>\n" : ">" + body + "</testcase>\n");
 }
@@ -158,8 +158,8 @@ std::string renderHtml(const std::vector<Result>& results) {
         sections += sectionOf(result);
     }
     const std::string summary = good == results.size()
-                                    ? foundation::format("All %zu may be let in.", good)
-                                    : foundation::format("%zu of %zu may be let in.", good, results.size());
+                                    ? values::format("All %zu may be let in.", good)
+                                    : values::format("%zu of %zu may be let in.", good, results.size());
     return std::string(kHead) + std::string(kStyle) + "</style>\n</head>\n<body>\n<h1>" + summary +
            "</h1>\n" + sections + "</body>\n</html>\n";
 }
@@ -172,11 +172,11 @@ std::string renderJUnit(const std::vector<Result>& results) {
         const Counts counts = countsOf(checks);
         all = {all.tests + counts.tests, all.failures + counts.failures, all.errors + counts.errors,
                all.skipped + counts.skipped};
-        suites += "  <testsuite name=\"" + foundation::markupText(result.path) + "\"" + attributesOf(counts) +
-                  ">\n";
+        suites +=
+            "  <testsuite name=\"" + base::markupText(result.path) + "\"" + attributesOf(counts) + ">\n";
         for (const Check& check : checks) suites += caseOf(result, check);
-        suites += "    <system-out>" + foundation::markupText(verdictName(result.verdict)) + ": " +
-                  foundation::markupText(result.conclusion) + "</system-out>\n  </testsuite>\n";
+        suites += "    <system-out>" + base::markupText(verdictName(result.verdict)) + ": " +
+                  base::markupText(result.conclusion) + "</system-out>\n  </testsuite>\n";
     }
     return "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<testsuites name=\"pinwell-gate\"" +
            attributesOf(all) + ">\n" + suites + "</testsuites>\n";

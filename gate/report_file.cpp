@@ -18,9 +18,9 @@ namespace {
 
 namespace fs = std::filesystem;
 
-foundation::Error cannotWrite(const std::string& name, int code) {
+base::Error cannotWrite(const std::string& name, int code) {
     const std::string reason = code == 0 ? std::string() : ": " + std::generic_category().message(code);
-    return {foundation::kPOSIXErrorDomain, code, "cannot write to " + name + reason};
+    return {base::kPOSIXErrorDomain, code, "cannot write to " + name + reason};
 }
 
 /// The status of a descriptor's regular file; `nullopt` for anything else.
@@ -36,11 +36,10 @@ bool isSame(const struct stat& a, const struct stat& b) {
 
 }  // namespace
 
-foundation::Result<void> ReportFile::open() {
+base::Result<void> ReportFile::open() {
     if (path_.empty()) return {};
     constexpr mode_t kMode = 0666;
-    file_ =
-        foundation::FileDescriptor(::open(path_.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOCTTY, kMode));
+    file_ = base::FileDescriptor(::open(path_.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOCTTY, kMode));
     if (!file_) return cannotWrite(path_, errno);
     return {};
 }
@@ -61,7 +60,7 @@ bool ReportFile::isSameAs(const ReportFile& other) const {
     return a && b && isSame(*a, *b);
 }
 
-foundation::Result<void> ReportFile::write(std::string_view document) {
+base::Result<void> ReportFile::write(std::string_view document) {
     const int descriptor = path_.empty() ? STDOUT_FILENO : file_.get();
     const std::string name = path_.empty() ? std::string("standard output") : path_;
     if (!path_.empty() && regularFile(descriptor) && ::ftruncate(descriptor, 0) != 0)

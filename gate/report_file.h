@@ -5,8 +5,8 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/error.h"
-#include "foundation/file_io.h"
+#include "base/error.h"
+#include "base/handle.h"
 
 namespace pinwell::gate {
 
@@ -19,7 +19,7 @@ class ReportFile {
     explicit ReportFile(std::string path) : path_(std::move(path)) {}
 
     /// Opens or creates the file.
-    foundation::Result<void> open();
+    base::Result<void> open();
 
     /// The first of `paths` that is this file, by any name; `nullptr` if none is. Always `nullptr` for
     /// devices and pipes.
@@ -29,11 +29,11 @@ class ReportFile {
     bool isSameAs(const ReportFile& other) const;
 
     /// Replaces the contents by the document. A closed pipe is not an error.
-    foundation::Result<void> write(std::string_view document);
+    base::Result<void> write(std::string_view document);
 
   private:
     std::string path_;
-    foundation::FileDescriptor file_;
+    base::FileDescriptor file_;
 };
 
 /// The first of `directories` that would contain a file at `path`, at any depth; `nullptr` if none.

@@ -42,12 +42,12 @@ void askService(std::vector<Case>& cases, const Platform& platform) {
 
 }  // namespace
 
-foundation::Result<TicketDirectory> TicketDirectory::open(const std::string& path) {
+base::Result<TicketDirectory> TicketDirectory::open(const std::string& path) {
     try {
         // The slash makes a link followed.
         return TicketDirectory(path, verify::OpenDirectory::atPath(path + "/"));
     } catch (const CodeError& error) {
-        return foundation::Error(foundation::kOSStatusErrorDomain, error.status(), error.what());
+        return base::Error(base::kOSStatusErrorDomain, error.status(), error.what());
     }
 }
 

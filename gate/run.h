@@ -9,8 +9,8 @@
 #include <utility>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/error.h"
+#include "base/bytes.h"
+#include "base/error.h"
 #include "src/platform.h"
 #include "verify/check.h"
 #include "verify/directory.h"
@@ -49,12 +49,12 @@ inline constexpr std::uint64_t kMaximumTicketFile = std::uint64_t{64} * 1024 * 1
 class TicketDirectory {
   public:
     /// Follows a link: the caller chose the directory.
-    static foundation::Result<TicketDirectory> open(const std::string& path);
+    static base::Result<TicketDirectory> open(const std::string& path);
 
     struct Found {
-        std::string file;                        // its path, whether it exists or not
-        std::optional<foundation::Data> ticket;  // `nullopt`: there is none
-        std::string problem;                     // why an existing file cannot be read
+        std::string file;                  // its path, whether it exists or not
+        std::optional<base::Data> ticket;  // `nullopt`: there is none
+        std::string problem;               // why an existing file cannot be read
     };
     Found find(const std::string& recordName) const;
 
@@ -91,8 +91,8 @@ struct Result {
     // Of the artefact; empty without a readable signature.
     std::string recordName;
     std::uint32_t digestType = 0;
-    foundation::Data codeHash;
-    foundation::Data fileDigest;  // SHA-256 of a file's bytes, if an attestation is wanted
+    base::Data codeHash;
+    base::Data fileDigest;  // SHA-256 of a file's bytes, if an attestation is wanted
 };
 
 /// One result for each path, in their order. `tickets` is null without --tickets.

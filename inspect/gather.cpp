@@ -5,22 +5,22 @@
 #include <system_error>
 #include <utility>
 
+#include "base/bytes.h"
 #include "formats/package_trailers.h"
 #include "formats/tm_ticket.h"
-#include "foundation/bytes.h"
-#include "foundation/format.h"
 #include "inspect/gather_ticket.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "src/PWHashedFile/file_kind.h"
 #include "src/ticket_record.h"
+#include "values/format.h"
 
 namespace pinwell::inspect {
 namespace {
 
-using foundation::ByteView;
-using foundation::URL;
+using base::ByteView;
+using values::URL;
 
 std::optional<std::uint64_t> sizeOf(const std::string& path) {
     std::error_code error;
@@ -28,7 +28,7 @@ std::optional<std::uint64_t> sizeOf(const std::string& path) {
     return error ? std::nullopt : std::optional<std::uint64_t>(size);
 }
 
-std::string reasonOf(const foundation::Error& error) {
+std::string reasonOf(const base::Error& error) {
     const std::string& reason = error.localizedFailureReason();
     return reason.empty() ? error.localizedDescription() : reason;
 }

@@ -5,9 +5,9 @@
 #include <string>
 
 #include "formats/explain_ticket.h"
-#include "foundation/url.h"
 #include "inspect/report.h"
 #include "src/platform.h"
+#include "values/url.h"
 
 namespace pinwell::inspect {
 
@@ -22,11 +22,11 @@ class Inspector {
 
   private:
     // Each returns the fault of the ticket's place.
-    std::optional<TicketPlaceFault> gatherBundle(const foundation::URL& url, Report& report) const;
-    std::optional<TicketPlaceFault> gatherImage(const foundation::URL& url, Report& report) const;
-    std::optional<TicketPlaceFault> gatherPackage(const foundation::URL& url, Report& report) const;
-    void gatherHeldTicket(foundation::ByteView bytes, std::uint64_t fileOffset, Report& report) const;
-    bool gatherBareTicket(const foundation::URL& url, bool mustLookLikeOne, Report& report) const;
+    std::optional<TicketPlaceFault> gatherBundle(const values::URL& url, Report& report) const;
+    std::optional<TicketPlaceFault> gatherImage(const values::URL& url, Report& report) const;
+    std::optional<TicketPlaceFault> gatherPackage(const values::URL& url, Report& report) const;
+    void gatherHeldTicket(base::ByteView bytes, std::uint64_t fileOffset, Report& report) const;
+    bool gatherBareTicket(const values::URL& url, bool mustLookLikeOne, Report& report) const;
 
     Platform platform_;
 };

@@ -6,13 +6,13 @@
 #include "formats/explain_ticket.h"
 #include "formats/satchel.h"
 #include "formats/tm_ticket.h"
-#include "foundation/value.h"
 #include "trust/der.h"
+#include "values/value.h"
 
 namespace pinwell::inspect {
 namespace {
 
-using foundation::ByteView;
+using base::ByteView;
 
 /// Maximum positions in a damaged certificate block where a certificate is searched.
 constexpr std::size_t kMaximumSearches = 4096;
@@ -100,7 +100,7 @@ void judgeChain(ByteView bytes, const satchel_view& view, trust::TrustService& s
     into.chain.trusted = chain.isTrusted();
     into.chain.reason = chain.problem;
     if (chain.evaluated == nullptr) return;
-    for (const foundation::Value& one : chain.evaluated->properties()) {
+    for (const values::Value& one : chain.evaluated->properties()) {
         const std::string* const title = one[trust::kPropertyTitle].string();
         const std::string* const error = one[trust::kPropertyError].string();
         into.chain.links.push_back({title == nullptr ? "" : *title, error == nullptr ? "" : *error});
@@ -122,7 +122,7 @@ Entry entryAt(const tm_ticket_survey& survey, std::uint64_t index, const std::op
     tm_cdhash record;
     if (tm_ticket_survey_copy_cdhash(survey, index, &record) != 0) return entry;
     entry.isUsable = true;
-    entry.hash = {record.algorithm, foundation::toData(ByteView(record.hash).first(record.length))};
+    entry.hash = {record.algorithm, base::toData(ByteView(record.hash).first(record.length))};
     entry.matches = artefact && artefact->bytes == entry.hash.bytes;
     return entry;
 }
@@ -200,7 +200,7 @@ Ticket gatherTicket(ByteView bytes, std::optional<std::uint64_t> fileOffset,
 bool looksLikeTicket(ByteView bytes) {
     const auto beginsWith = [](ByteView part, std::string_view magic) {
         return part.size() >= magic.size() &&
-               std::ranges::equal(part.first(magic.size()), foundation::asBytes(magic));
+               std::ranges::equal(part.first(magic.size()), base::asBytes(magic));
     };
     if (beginsWith(bytes, kSatchelMagic)) return true;
     const satchel_survey survey = satchel_survey_container(bytes);

@@ -1,7 +1,7 @@
 // A ticket, read tolerantly and judged: container, certificates, chain, signature, payload.
 #pragma once
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "inspect/report.h"
 #include "trust/trust.h"
 
@@ -14,10 +14,10 @@ struct Holder {
 
 /// Shows the ticket, with the reason if explain_ticket refuses it. `holder` is `nullopt` for a ticket by
 /// itself, which is then judged without an artefact.
-Ticket gatherTicket(foundation::ByteView bytes, std::optional<std::uint64_t> fileOffset,
+Ticket gatherTicket(base::ByteView bytes, std::optional<std::uint64_t> fileOffset,
                     const std::optional<Holder>& holder, trust::TrustService& service);
 
 /// Whether the bytes look like a ticket, possibly a damaged one.
-bool looksLikeTicket(foundation::ByteView bytes);
+bool looksLikeTicket(base::ByteView bytes);
 
 }  // namespace pinwell::inspect

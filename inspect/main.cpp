@@ -13,11 +13,11 @@
 
 #include "companion/command_line.h"
 #include "companion/streams.h"
-#include "foundation/process.h"
-#include "foundation/stack_guard.h"
 #include "inspect/gather.h"
 #include "inspect/render_json.h"
 #include "inspect/render_text.h"
+#include "runtime/process.h"
+#include "runtime/signals.h"
 #include "sandbox/sandbox.h"
 #include "src/confinement.h"
 #include "src/messages.h"
@@ -49,7 +49,7 @@ void limitRunaways(const Arguments& arguments) {
     static const std::atomic<std::int32_t> status{EX_NOINPUT};
     std::uint64_t seconds = 0;
     for (const std::string& path : arguments.paths)
-        seconds += processorSecondsForArtefact(foundation::URL::fileURLWithPath(path));
+        seconds += processorSecondsForArtefact(values::URL::fileURLWithPath(path));
     sandbox::limitRunaways(seconds,
                            {STDERR_FILENO, "pinwell-inspect: gave up: it takes too much processor time",
                             "pinwell-inspect: gave up: something is nested too deeply", &status});
@@ -60,7 +60,7 @@ int inspectAll(const Arguments& arguments) {
     verboseLevel = kVerbosityQuiet;
     const HostPlatform host([](int) {});
     limitRunaways(arguments);
-    const foundation::StackGuard guard;
+    const runtime::StackGuard guard;
     giveUpRights(arguments, host.services());
     const inspect::Inspector inspector(host.services());
     const bool inColor = companion::wantsColor(arguments.color, STDOUT_FILENO);
@@ -116,7 +116,7 @@ int run(int argc, char** argv) {
 }  // namespace
 
 int main(int argc, char** argv) {
-    foundation::occupyStandardStreams();
+    runtime::occupyStandardStreams();
     // A closed pipe becomes a failed write.
     std::signal(SIGPIPE, SIG_IGN);
     try {

@@ -3,14 +3,15 @@
 #include <nlohmann/json.hpp>
 #include <utility>
 
+#include "base/bytes.h"
+#include "base/text.h"
 #include "formats/superblob.h"
-#include "foundation/bytes.h"
 
 namespace pinwell::inspect {
 namespace {
 
 using Json = nlohmann::ordered_json;
-using foundation::toHex;
+using base::toHex;
 
 template <class T, class Convert>
 Json orNull(const std::optional<T>& value, Convert convert) {

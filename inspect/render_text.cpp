@@ -3,14 +3,15 @@
 #include <algorithm>
 #include <utility>
 
+#include "base/text.h"
 #include "formats/superblob.h"
-#include "foundation/format.h"
+#include "values/format.h"
 
 namespace pinwell::inspect {
 namespace {
 
-using foundation::format;
-using foundation::toHex;
+using base::toHex;
+using values::format;
 
 constexpr const char* kBold = "1";
 constexpr const char* kGreen = "1;32";
@@ -58,9 +59,7 @@ class Page {
         plain(padded("  " + label, kValueColumn) + value);
     }
 
-    void fault(const std::string& what) {
-        line("", coloured(kRed, "! " + foundation::escapeForTerminal(what)));
-    }
+    void fault(const std::string& what) { line("", coloured(kRed, "! " + base::escapeForTerminal(what))); }
     void fault(const std::optional<Fault>& fault) {
         if (fault) this->fault(fault->rule + placeOf(*fault));
     }
@@ -306,15 +305,14 @@ const char* colourOf(Outcome outcome) {
 
 std::string renderText(const Report& report, bool colour) {
     Page page(colour);
-    page.plain(page.coloured(kBold, foundation::escapeForTerminal(report.path)));
+    page.plain(page.coloured(kBold, base::escapeForTerminal(report.path)));
     showItem(report, page);
     showCode(report, page);
     showHash(report, page);
     showPlace(report, page);
     showTicket(report, page);
     page.gap();
-    page.plain("  " +
-               page.coloured(colourOf(report.outcome), foundation::escapeForTerminal(report.conclusion)));
+    page.plain("  " + page.coloured(colourOf(report.outcome), base::escapeForTerminal(report.conclusion)));
     if (report.fault) {
         const std::string where = Page::placeOf(*report.fault);
         if (!where.empty()) page.plain("  The first fault is" + where.substr(1) + ".");

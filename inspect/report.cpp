@@ -3,8 +3,8 @@
 #include <sysexits.h>
 
 #include "formats/package_trailers.h"
-#include "foundation/date.h"
-#include "foundation/format.h"
+#include "values/date.h"
+#include "values/format.h"
 
 namespace pinwell::inspect {
 
@@ -75,14 +75,14 @@ std::string cpuTypeName(std::uint32_t cpuType) {
         case codesign::kCpuType64X86:
             return "64-bit x86";
         default:
-            return foundation::format("CPU type 0x%08x", cpuType);
+            return values::format("CPU type 0x%08x", cpuType);
     }
 }
 
 std::optional<std::string> timeText(std::uint64_t seconds) {
     constexpr std::uint64_t kEndOfYear9999 = 253'402'300'799;
     if (seconds > kEndOfYear9999) return std::nullopt;
-    return foundation::toString(foundation::Date{static_cast<std::int64_t>(seconds)});
+    return values::describe(values::Date{static_cast<std::int64_t>(seconds)});
 }
 
 }  // namespace pinwell::inspect

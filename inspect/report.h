@@ -10,14 +10,14 @@
 #include <variant>
 #include <vector>
 
+#include "base/bytes.h"
 #include "codesign/code_description.h"
 #include "formats/explain_ticket.h"
-#include "foundation/bytes.h"
 #include "trust/certificate_description.h"
 
 namespace pinwell::inspect {
 
-using foundation::Data;
+using base::Data;
 
 /// The maximum length of each list; the rest is only counted. A ticket's own limit is some 800,000.
 inline constexpr std::size_t kMaximumEntriesKept = 65'536;

@@ -17,7 +17,7 @@
 
 namespace pinwell::library {
 
-using foundation::URL;
+using values::URL;
 using verify::Kind;
 using verify::Outcome;
 

@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "pinwell/ticket.h"
 #include "pinwell/ticket_c.h"
 #include "verify/check.h"
@@ -34,8 +34,8 @@ struct Assessment {
     std::string reason;
     std::string recordName;  // empty without a hash
     std::uint32_t digestType = 0;
-    std::optional<foundation::Data> codeHash;
-    std::optional<foundation::Data> ticket;
+    std::optional<base::Data> codeHash;
+    std::optional<base::Data> ticket;
     std::vector<PlacedCheck> checks;
 };
 
@@ -45,7 +45,7 @@ Assessment assess(const std::string& path, Depth depth, const ticket::TrustedRoo
 
 /// A ticket and its file.
 struct LocatedTicket {
-    foundation::Data bytes;
+    base::Data bytes;
     std::string file;
     std::uint64_t offset = 0;
 };

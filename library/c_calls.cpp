@@ -6,7 +6,7 @@
 #include <cstring>
 #include <string_view>
 
-#include "foundation/description.h"
+#include "base/text.h"
 #include "library/handles.h"
 #include "src/messages.h"
 
@@ -62,7 +62,7 @@ pinwell_status report(const Failure& failure, pinwell_error* error) noexcept {
     if (error == nullptr) return failure.status;
     try {
         fill(*error, failure.status, failure.systemError, failure.offset,
-             foundation::escapeForTerminal(failure.message));
+             base::escapeForTerminal(failure.message));
     } catch (...) {
         fill(*error, failure.status, failure.systemError, failure.offset, pinwell_error_text(failure.status));
     }

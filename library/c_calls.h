@@ -9,7 +9,7 @@
 #include <string>
 #include <utility>
 
-#include "foundation/error.h"
+#include "base/error.h"
 #include "pinwell/ticket.h"
 #include "pinwell/ticket_c.h"
 
@@ -35,10 +35,10 @@ inline Failure failureOf(const ticket::Error& error) {
 }
 
 /// Converts an error of the services about a file.
-inline Failure failureOf(const foundation::Error& error) {
+inline Failure failureOf(const base::Error& error) {
     const std::string& reason = error.localizedFailureReason();
     return {PINWELL_ERROR_UNREADABLE, reason.empty() ? error.localizedDescription() : reason,
-            error.domain() == foundation::kPOSIXErrorDomain ? static_cast<int>(error.code()) : 0};
+            error.domain() == base::kPOSIXErrorDomain ? static_cast<int>(error.code()) : 0};
 }
 
 /// While it lives, the calling thread cannot be cancelled: cancellation would unwind through a C function.

@@ -18,7 +18,7 @@ namespace {
 }
 
 class NoSessions final : public https::SessionService {
-    foundation::Result<std::shared_ptr<https::Session>> ephemeralSession(https::SessionDelegate&) override {
+    base::Result<std::shared_ptr<https::Session>> ephemeralSession(https::SessionDelegate&) override {
         refuse("the library asks no service");
     }
 };
@@ -44,7 +44,7 @@ struct LocalPlatform::Services {
               [contents = roots == nullptr ? nullptr : ticket::TrustedRootsAccess::contentsOf(*roots)] {
                   return contents == nullptr ? trust::Anchors() : contents->anchors;
               },
-              [evaluationTime] { return foundation::Date{evaluationTime}; })) {}
+              [evaluationTime] { return values::Date{evaluationTime}; })) {}
 
     const std::unique_ptr<types::TypeService> types = types::makeTypeService(types::MimeDatabase::leftAlone);
     const std::unique_ptr<files::FileManager> files;
@@ -53,7 +53,7 @@ struct LocalPlatform::Services {
     const std::unique_ptr<https::SessionService> https = std::make_unique<NoSessions>();
     const std::unique_ptr<defaults::UserDefaultsService> defaults = std::make_unique<NoDefaults>();
     const std::unique_ptr<syslog::SystemLog> log = std::make_unique<NoLog>();
-    const foundation::PlatformDirectory directory{std::string()};
+    const config::PlatformDirectory directory{std::string()};
 };
 
 LocalPlatform::LocalPlatform(const ticket::TrustedRoots* roots, std::int64_t evaluationTime)

@@ -4,13 +4,13 @@
 
 #include <utility>
 
+#include "base/bytes.h"
+#include "base/error.h"
 #include "files/file_reader.h"
 #include "formats/disk_image.h"
 #include "formats/package_trailers.h"
 #include "formats/satchel.h"
 #include "formats/tm_ticket.h"
-#include "foundation/bytes.h"
-#include "foundation/error.h"
 
 namespace pinwell::ticket {
 inline namespace v1 {
@@ -22,7 +22,7 @@ static_assert(TrailerType{kTicketTrailerType} == TrailerType::ticket);
 namespace {
 
 using files::FileReader;
-using Opened = foundation::Result<std::unique_ptr<FileReader>>;
+using Opened = base::Result<std::unique_ptr<FileReader>>;
 
 /// The parsers' diagnostics, which name the file, are for the tool's verbose mode.
 constexpr const char* kNoName = "";
@@ -31,8 +31,8 @@ Error malformed(const ticket_fault& fault, std::uint64_t base = 0) {
     return {ErrorCode::malformed, base + fault.offset, 0, fault.rule};
 }
 
-Error unreadable(const foundation::Error& error) {
-    const bool isErrno = error.domain() == foundation::kPOSIXErrorDomain;
+Error unreadable(const base::Error& error) {
+    const bool isErrno = error.domain() == base::kPOSIXErrorDomain;
     return {ErrorCode::unreadable, 0, isErrno ? static_cast<int>(error.code()) : 0,
             error.localizedFailureReason()};
 }
@@ -68,7 +68,7 @@ Result<DiskImage> diskImageIn(FileReader& file) {
         const std::uint64_t offset = whole.offset + whole.length - bytes.size();
         // A ticket is returned whole or not at all.
         if (const auto fault = faultOfTicketLength(bytes.size(), offset)) return malformed(*fault);
-        image.ticket = FoundTicket{{offset, bytes.size()}, foundation::toData(bytes)};
+        image.ticket = FoundTicket{{offset, bytes.size()}, base::toData(bytes)};
     }
     return image;
 }
@@ -133,7 +133,7 @@ std::optional<Entry> entryAt(const Payload& payload, std::uint64_t index) {
     const tm_ticket_survey survey = tm_ticket_survey_payload(payload.bytes);
     tm_cdhash cdhash;
     if (survey.fault || tm_ticket_survey_copy_cdhash(survey, index, &cdhash) != 0) return std::nullopt;
-    return Entry{cdhash.algorithm, foundation::toData(ByteView(cdhash.hash).first(cdhash.length))};
+    return Entry{cdhash.algorithm, base::toData(ByteView(cdhash.hash).first(cdhash.length))};
 }
 
 Result<DiskImage> readDiskImage(const std::string& path) {

@@ -3,13 +3,13 @@
 #include <algorithm>
 #include <utility>
 
+#include "config/platform_directory.h"
 #include "formats/explain_ticket.h"
 #include "formats/tm_ticket.h"
-#include "foundation/date.h"
-#include "foundation/platform_directory.h"
 #include "library/roots.h"
 #include "trust/certificate.h"
 #include "trust/trust_service.h"
+#include "values/date.h"
 
 namespace pinwell::ticket {
 inline namespace v1 {
@@ -79,7 +79,7 @@ Result<TrustedRoots> TrustedRoots::fromCertificates(ByteView pemOrDer) {
 
 TrustedRoots TrustedRoots::fromPlatformDirectory(const std::string& path) {
     auto contents = std::make_shared<Contents>();
-    contents->anchors = trust::loadAnchors(foundation::PlatformDirectory(path), [&](std::string_view line) {
+    contents->anchors = trust::loadAnchors(config::PlatformDirectory(path), [&](std::string_view line) {
         contents->problems.emplace_back(line);
     });
     return TrustedRoots(std::move(contents));
@@ -97,7 +97,7 @@ Validation validate(ByteView ticket, const TrustedRoots& roots, std::int64_t eva
                     std::span<const ByteView> cdhashes) {
     const auto& contents = TrustedRootsAccess::contentsOf(roots);
     const auto service = trust::makeTrustService([&] { return contents->anchors; },
-                                                 [&] { return foundation::Date{evaluationTime}; });
+                                                 [&] { return values::Date{evaluationTime}; });
     tm_ticket* decoded = nullptr;
     if (satchel_get_validated_tm_ticket(ticket.data(), ticket.size(), &decoded, *service) != 0)
         return refused(explainRefusedTicket(ticket, *service));

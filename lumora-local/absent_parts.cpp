@@ -1,8 +1,8 @@
 // The parts that this build leaves out. Their commands and options are there, and say so.
-#include "foundation/format.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/metrics.h"
 #include "lumora-local/signing_key.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 
@@ -19,8 +19,8 @@ std::string describeMetrics(const ServiceCounts::Snapshot&, const ServiceFacts&)
 
 #if !PINWELL_HAS_PKCS11
 std::unique_ptr<DigestSigner> openTokenKey(const std::string& uri) {
-    throw Failure(EX_CONFIG, foundation::format("cannot use %@: this program was built without PKCS #11",
-                                                uri.substr(0, uri.find('?'))));
+    throw Failure(EX_CONFIG, values::format("cannot use %@: this program was built without PKCS #11",
+                                            uri.substr(0, uri.find('?'))));
 }
 #endif
 

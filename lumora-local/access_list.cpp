@@ -5,16 +5,16 @@
 #define TOML_EXCEPTIONS 0
 #include <toml++/toml.h>
 
-#include "foundation/bytes.h"
-#include "foundation/file_io.h"
-#include "foundation/format.h"
-#include "foundation/toml_keys.h"
+#include "base/bytes.h"
+#include "base/file_io.h"
 #include "lumora-local/failure.h"
+#include "values/format.h"
+#include "values/toml_keys.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::format;
+using values::format;
 using Clients = std::map<std::string, Rights, std::less<>>;
 
 constexpr std::size_t kMaximumFileSize = std::size_t{1024} * 1024;
@@ -87,13 +87,13 @@ class AccessReader {
 }  // namespace
 
 Clients readAccessFile(const std::string& path) {
-    const foundation::Result<foundation::Data> document = foundation::readSmallFile(path, kMaximumFileSize);
+    const base::Result<base::Data> document = base::readSmallFile(path, kMaximumFileSize);
     if (!document) {
-        throw Failure(EX_CONFIG, format("%@: %@", path, foundation::whyUnreadable(document.error())));
+        throw Failure(EX_CONFIG, format("%@: %@", path, base::whyUnreadable(document.error())));
     }
     AccessReader reader(path);
-    const std::string text = foundation::toString(*document);
-    if (const auto line = foundation::lineOfLongTomlKey(text, kMaximumKeyParts)) {
+    const std::string text = base::toString(*document);
+    if (const auto line = values::lineOfLongTomlKey(text, kMaximumKeyParts)) {
         throw Failure(EX_CONFIG, format("%@:%u: a key of more than %u parts", path, *line, kMaximumKeyParts));
     }
     const toml::parse_result parsed = toml::parse(std::string_view(text), path);

@@ -1,21 +1,21 @@
 #include "lumora-local/access_log.h"
 
-#include "foundation/format.h"
-#include "foundation/json.h"
-#include "foundation/markup.h"
-#include "foundation/value.h"
+#include "base/text.h"
 #include "lumora-local/rfc3339.h"
+#include "values/format.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Array;
-using foundation::Dictionary;
-using foundation::Value;
+using values::Array;
+using values::Dictionary;
+using values::Value;
 
 /// JSON is UTF-8. A client may send other bytes, and control characters, which drive terminals.
 std::string printable(std::string_view text) {
-    return foundation::escapeForDisplay(text);
+    return base::escapeForDisplay(text);
 }
 
 /// In quotes that the text cannot end.
@@ -29,8 +29,8 @@ std::string inQuotes(std::string_view text) {
 }
 
 std::string jsonLine(Dictionary members) {
-    const auto document = foundation::serializeJSON(Value(std::move(members)));
-    return document ? foundation::toString(*document) : std::string(R"({"level":"error"})");
+    const auto document = values::serializeJSON(Value(std::move(members)));
+    return document ? base::toString(*document) : std::string(R"({"level":"error"})");
 }
 
 }  // namespace
@@ -38,9 +38,9 @@ std::string jsonLine(Dictionary members) {
 std::string describeRequest(const RequestEntry& entry, LogForm form) {
     if (form == LogForm::text) {
         std::string line =
-            foundation::format("%@ %s %s %d %zu %s", entry.time, entry.peer,
-                               inQuotes(std::string(entry.method) + ' ' + std::string(entry.target)),
-                               entry.status, entry.size, entry.identifier);
+            values::format("%@ %s %s %d %zu %s", entry.time, entry.peer,
+                           inQuotes(std::string(entry.method) + ' ' + std::string(entry.target)),
+                           entry.status, entry.size, entry.identifier);
         if (!entry.client.empty()) line += ' ' + inQuotes(entry.client);
         return line;
     }
@@ -63,7 +63,7 @@ std::string describeRequest(const RequestEntry& entry, LogForm form) {
     return jsonLine(std::move(members));
 }
 
-std::string messageAsJson(foundation::Date time, std::string_view level, std::string_view message) {
+std::string messageAsJson(values::Date time, std::string_view level, std::string_view message) {
     return jsonLine({{"time", toRfc3339(time)}, {"level", level}, {"message", printable(message)}});
 }
 

@@ -6,7 +6,7 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/date.h"
+#include "values/date.h"
 
 namespace pinwell::lumora {
 
@@ -17,7 +17,7 @@ enum class LogForm {
 
 /// A request with its response. Texts are as the client sent them.
 struct RequestEntry {
-    foundation::Date time;
+    values::Date time;
     std::string_view peer;
     std::string_view client;  // common name of its certificate; empty if the server requests none
     std::string_view method;  // empty if the head is unreadable
@@ -33,6 +33,6 @@ struct RequestEntry {
 std::string describeRequest(const RequestEntry& entry, LogForm form);
 
 /// A line about the service itself: {"time", "level", "message"}. `level` is info or error.
-std::string messageAsJson(foundation::Date time, std::string_view level, std::string_view message);
+std::string messageAsJson(values::Date time, std::string_view level, std::string_view message);
 
 }  // namespace pinwell::lumora

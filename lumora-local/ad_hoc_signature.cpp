@@ -4,25 +4,26 @@
 #include <array>
 #include <utility>
 
+#include "base/byte_io.h"
+#include "base/text.h"
 #include "formats/superblob.h"
-#include "foundation/byte_writer.h"
-#include "foundation/format.h"
-#include "foundation/property_list.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/sha256.h"
+#include "values/format.h"
+#include "values/property_list.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteView;
-using foundation::ByteWriter;
-using foundation::Data;
-using foundation::Dictionary;
+using base::ByteView;
+using base::ByteWriter;
+using base::Data;
+using values::Dictionary;
 
 }  // namespace
 
-foundation::Data propertyListDocument(const foundation::Dictionary& dictionary) {
-    foundation::Result<foundation::Data> document = foundation::serializePropertyList(dictionary);
+base::Data propertyListDocument(const values::Dictionary& dictionary) {
+    base::Result<base::Data> document = values::serializePropertyList(dictionary);
     if (!document) throw Failure(EX_SOFTWARE, document.error().localizedDescription());
     return *std::move(document);
 }
@@ -173,8 +174,8 @@ void ResourceSeal::addLink(const std::string& path, const std::string& target) {
 void ResourceSeal::addNestedCode(const std::string& path, const std::vector<Data>& codeHashes) {
     std::string requirement;
     for (const Data& hash : codeHashes)
-        requirement += foundation::format("%@cdhash H\"%@\"", requirement.empty() ? "" : " or ",
-                                          foundation::toHex(hash));
+        requirement +=
+            values::format("%@cdhash H\"%@\"", requirement.empty() ? "" : " or ", base::toHex(hash));
     files2_[path] = Dictionary{{"cdhash", codeHashes.front()}, {"requirement", requirement}};
 }
 

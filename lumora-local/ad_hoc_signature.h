@@ -15,56 +15,56 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/value.h"
+#include "base/bytes.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 
 /// A property list in XML. Throws Failure when it cannot be made.
-foundation::Data propertyListDocument(const foundation::Dictionary& dictionary);
+base::Data propertyListDocument(const values::Dictionary& dictionary);
 
 struct AdHocSignature {
     std::string identifier;
 
     /// The bytes under the page hashes: the file from its start to the signature. Borrowed.
-    foundation::ByteView code;
+    base::ByteView code;
 
     /// The contents for the special slots, by slot number from 1. The requirements, slot 2, are added; slots
     /// that are not named are zero.
-    std::map<std::uint32_t, foundation::Data> components{};
+    std::map<std::uint32_t, base::Data> components{};
 
     /// The code is a program's own image, and not data.
     bool isMainProgram = false;
 
     /// Its length depends only on the identifier, the length of the code and the highest slot.
-    foundation::Data superblob() const;
+    base::Data superblob() const;
 
     /// The code hash: 20 bytes.
-    foundation::Data codeHash() const;
+    base::Data codeHash() const;
 
   private:
-    foundation::Data codeDirectory() const;
+    base::Data codeDirectory() const;
 };
 
 /// The seal of a bundle. Paths are relative to the directory that the seal's own directory is in.
 class ResourceSeal {
   public:
-    void addFile(const std::string& path, foundation::ByteView contents);
+    void addFile(const std::string& path, base::ByteView contents);
 
     /// A file that may be missing, such as localized resources.
-    void addOptionalFile(const std::string& path, foundation::ByteView contents);
+    void addOptionalFile(const std::string& path, base::ByteView contents);
 
     void addLink(const std::string& path, const std::string& target);
 
     /// Nested code, a file or a bundle: with any of these code hashes. Readers use the first
     /// one.
-    void addNestedCode(const std::string& path, const std::vector<foundation::Data>& codeHashes);
+    void addNestedCode(const std::string& path, const std::vector<base::Data>& codeHashes);
 
-    foundation::Data document() const;
+    base::Data document() const;
 
   private:
-    foundation::Dictionary files_;
-    foundation::Dictionary files2_;
+    values::Dictionary files_;
+    values::Dictionary files2_;
 };
 
 }  // namespace pinwell::lumora

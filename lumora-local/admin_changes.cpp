@@ -1,30 +1,28 @@
 #include <algorithm>
 #include <initializer_list>
 
-#include "foundation/base64.h"
-#include "foundation/format.h"
-#include "foundation/json.h"
-#include "foundation/markup.h"
-#include "foundation/utf8.h"
-#include "foundation/value.h"
+#include "base/text.h"
 #include "lumora-local/admin_routes.h"
 #include "lumora-local/sha256.h"
+#include "values/format.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Array;
-using foundation::Dictionary;
-using foundation::format;
-using foundation::Value;
+using values::Array;
+using values::Dictionary;
+using values::format;
+using values::Value;
 
 constexpr int kUnprocessable = 422;
 constexpr std::size_t kMaximumKeyLength = 255;
 
 bool hasControlCharacters(std::string_view text) {
     while (!text.empty()) {
-        const std::size_t size = foundation::utf8SequenceLength(text);
-        if (size == 0 || foundation::isControlCharacter(text.substr(0, size))) return true;
+        const std::size_t size = base::utf8SequenceLength(text);
+        if (size == 0 || base::isControlCharacter(text.substr(0, size))) return true;
         text.remove_prefix(size);
     }
     return false;
@@ -34,8 +32,7 @@ bool hasControlCharacters(std::string_view text) {
 class Members {
   public:
     Members(std::string_view body, std::initializer_list<std::string_view> known) {
-        foundation::Result<Value> document =
-            foundation::parseJSON(foundation::asBytes(body), foundation::EqualKeys::refused);
+        base::Result<Value> document = values::parseJSON(base::asBytes(body), values::EqualKeys::refused);
         if (!document) {
             throw Refused(400, format("the body is not JSON: %@", document.error().localizedDescription()));
         }
@@ -143,7 +140,7 @@ RevocationRequest parseRevocationRequest(std::string_view body) {
 
 RefusedAttempt attemptIn(std::string_view body) {
     RefusedAttempt attempt;
-    const foundation::Result<Value> document = foundation::parseJSON(foundation::asBytes(body));
+    const base::Result<Value> document = values::parseJSON(base::asBytes(body));
     if (!document || document->dictionary() == nullptr) return attempt;
     const std::string* record = (*document)["record"].string();
     if (record != nullptr && parseRecordName(*record)) attempt.record = *record;
@@ -167,11 +164,11 @@ std::string parseIdempotencyKey(std::string_view header) {
 namespace {
 
 Occasion occasionOf(const AdminRequest& request, const std::string& comment) {
-    Occasion occasion{foundation::Date::now(), request.head.client, std::nullopt, comment, false};
+    Occasion occasion{values::Date::now(), request.head.client, std::nullopt, comment, false};
     if (request.idempotencyKey) {
         const std::string all = std::string(request.path) + '\n' + std::string(request.body);
         occasion.request = RequestIdentity{request.head.client, *request.idempotencyKey,
-                                           foundation::toHex(sha256(foundation::asBytes(all)))};
+                                           base::toHex(sha256(base::asBytes(all)))};
     }
     return occasion;
 }
@@ -194,15 +191,15 @@ auto changing(Work&& work) {
 
 Answer answerOf(const Event& event, Dictionary members, int status) {
     members["record"] = event.record;
-    members["label"] = foundation::escapeForDisplay(event.label);
+    members["label"] = base::escapeForDisplay(event.label);
     members["environment"] = toString(event.environment);
     members["action"] = toString(event.action);
     members["event"] = event.hash;
-    const auto document = foundation::serializeJSON(members);
+    const auto document = values::serializeJSON(members);
     if (!document) throw Failure(EX_SOFTWARE, document.error().localizedDescription());
     Answer answer;
     answer.status = status;
-    answer.body = foundation::toString(*document);
+    answer.body = base::toString(*document);
     answer.records = {event.record};
     return answer;
 }
@@ -218,7 +215,7 @@ Answer issueTicket(RecordStore& store, const TicketSigner& signer, const AdminRe
     occasion.reinstates = wanted.reinstates;
     const Change change = changing(
         [&] { return issueDescribed(store, signer, wanted.environment, wanted.artefact, occasion); });
-    return answerOf(change.event, {{"ticket", foundation::encodeBase64(change.ticket)}},
+    return answerOf(change.event, {{"ticket", base::encodeBase64(change.ticket)}},
                     change.event.action == Action::issued ? 201 : 200);
 }
 

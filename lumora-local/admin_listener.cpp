@@ -6,15 +6,15 @@
 #include <exception>
 #include <utility>
 
-#include "foundation/format.h"
 #include "lumora-local/admin_routes.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/service_store.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::format;
+using values::format;
 
 constexpr TokenBuckets::Allowance kRequestRate{200, std::chrono::milliseconds(50)};
 constexpr std::size_t kWorkers = 4;

@@ -1,24 +1,23 @@
 #include <algorithm>
 #include <charconv>
 
-#include "foundation/format.h"
-#include "foundation/hex.h"
-#include "foundation/json.h"
-#include "foundation/markup.h"
-#include "foundation/value.h"
+#include "base/text.h"
 #include "lumora-local/admin_routes.h"
 #include "lumora-local/admin_service.h"
 #include "lumora-local/record_name.h"
 #include "lumora-local/rfc3339.h"
+#include "values/format.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Array;
-using foundation::Data;
-using foundation::Dictionary;
-using foundation::format;
-using foundation::Value;
+using base::Data;
+using values::Array;
+using values::Dictionary;
+using values::format;
+using values::Value;
 
 constexpr std::size_t kMaximumName = 255;
 constexpr std::size_t kMaximumTime = 64;
@@ -69,7 +68,7 @@ Environment environmentOf(const Query& query) {
 
 Data hashOf(const std::string& text) {
     if (const std::optional<CodeHash> named = parseRecordName(text)) return named->hash;
-    std::optional<Data> bytes = foundation::parseHex(text);
+    std::optional<Data> bytes = base::parseHex(text);
     if (!bytes || (bytes->size() != hashLength(2) && bytes->size() != hashLength(4)))
         refuse("hash", "is neither 40 nor 96 lower-case hexadecimal digits, nor a record's name");
     return *std::move(bytes);
@@ -77,9 +76,9 @@ Data hashOf(const std::string& text) {
 
 RecordCursor recordCursorIn(const std::string& text) {
     const std::size_t colon = text.find(':');
-    const auto label = foundation::parseHex(std::string_view(text).substr(0, std::min(colon, text.size())));
+    const auto label = base::parseHex(std::string_view(text).substr(0, std::min(colon, text.size())));
     if (colon == std::string::npos || !label) refuse("after", "is not what a page gave as \"next\"");
-    RecordCursor cursor{foundation::toString(*label), text.substr(colon + 1)};
+    RecordCursor cursor{base::toString(*label), text.substr(colon + 1)};
     if (cursor.name.empty() || !isPrintable(cursor.name))
         refuse("after", "is not what a page gave as \"next\"");
     return cursor;
@@ -98,7 +97,7 @@ Value asValue(const FoundRecord& found, Environment environment) {
     Array hashes;
     for (const CodeHash& hash : found.record.hashes) hashes.emplace_back(recordName(hash));
     return Dictionary{
-        {"record", found.record.name},          {"label", foundation::escapeForDisplay(found.record.label)},
+        {"record", found.record.name},          {"label", base::escapeForDisplay(found.record.label)},
         {"environment", toString(environment)}, {"revoked", found.record.revoked},
         {"asset", found.record.asAsset},        {"signed", toRfc3339(found.record.signedAt)},
         {"hashes", std::move(hashes)},          {"hashesCut", found.hashesCut}};
@@ -110,11 +109,10 @@ Answer findRecords(RecordStore& store, const AdminRequest& request) {
     Array records;
     for (const FoundRecord& found : page.records) records.push_back(asValue(found, search.environment));
     const Value next = page.next ? Value(toString(*page.next)) : Value(Value::Null());
-    const auto document =
-        foundation::serializeJSON(Dictionary{{"records", std::move(records)}, {"next", next}});
+    const auto document = values::serializeJSON(Dictionary{{"records", std::move(records)}, {"next", next}});
     if (!document) throw Failure(EX_SOFTWARE, document.error().localizedDescription());
     Answer answer;
-    answer.body = foundation::toString(*document);
+    answer.body = base::toString(*document);
     return answer;
 }
 
@@ -136,7 +134,7 @@ Answer listEvents(RecordStore& store, const AdminRequest& request) {
 }  // namespace
 
 std::string toString(const RecordCursor& cursor) {
-    return foundation::toHex(foundation::asBytes(cursor.label)) + ":" + cursor.name;
+    return base::toHex(base::asBytes(cursor.label)) + ":" + cursor.name;
 }
 
 std::string toString(const EventCursor& cursor) {

@@ -4,17 +4,17 @@
 #include <exception>
 #include <utility>
 
-#include "foundation/format.h"
-#include "foundation/json.h"
-#include "foundation/markup.h"
-#include "foundation/value.h"
+#include "base/text.h"
 #include "lumora-local/admin_routes.h"
+#include "values/format.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Dictionary;
-using foundation::format;
+using values::Dictionary;
+using values::format;
 
 }  // namespace
 
@@ -88,12 +88,11 @@ Answer problem(int status, std::string_view detail) {
     answer.status = status;
     answer.contentType = "application/problem+json";
     // The detail may repeat the client's text: without control characters, and in UTF-8.
-    const auto document =
-        foundation::serializeJSON(Dictionary{{"type", "about:blank"},
-                                             {"title", titleOf(status)},
-                                             {"status", status},
-                                             {"detail", foundation::escapeForDisplay(detail)}});
-    answer.body = document ? foundation::toString(*document) : std::string("{}");
+    const auto document = values::serializeJSON(Dictionary{{"type", "about:blank"},
+                                                           {"title", titleOf(status)},
+                                                           {"status", status},
+                                                           {"detail", base::escapeForDisplay(detail)}});
+    answer.body = document ? base::toString(*document) : std::string("{}");
     return answer;
 }
 
@@ -129,7 +128,7 @@ void RefusalLog::note(const std::string& client, const RefusedAttempt& attempt,
             }
             leftOut = std::exchange(leftOut_, 0);
         }
-        Occasion occasion{foundation::Date::now(), client, std::nullopt, why, false};
+        Occasion occasion{values::Date::now(), client, std::nullopt, why, false};
         if (leftOut > 0) {
             occasion.comment += format(" (%llu more attempts before it are not in the log)",
                                        static_cast<unsigned long long>(leftOut));

@@ -25,10 +25,10 @@
 #include <unordered_map>
 #include <vector>
 
-#include "foundation/date.h"
 #include "lumora-local/access_list.h"
 #include "lumora-local/http_service.h"
 #include "lumora-local/record_store.h"
+#include "values/date.h"
 
 namespace pinwell::lumora {
 

@@ -3,21 +3,21 @@
 #include <filesystem>
 #include <system_error>
 
-#include "foundation/bytes.h"
-#include "foundation/format.h"
-#include "foundation/url.h"
+#include "base/bytes.h"
 #include "lumora-local/failure.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/cdhash_extract.h"
 #include "src/messages.h"
 #include "src/platform.h"
+#include "values/format.h"
+#include "values/url.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Data;
-using foundation::format;
-using foundation::URL;
+using base::Data;
+using values::format;
+using values::URL;
 
 class PinwellArtefactHasher final : public ArtefactHasher {
   public:

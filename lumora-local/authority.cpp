@@ -8,7 +8,7 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Date;
+using values::Date;
 
 // RFC 5280, appendix A: ub-common-name.
 constexpr std::size_t kMaximumCommonNameLength = 64;
@@ -61,8 +61,8 @@ IssuedCertificate readIssuer(const IssuerFiles& files) {
                              readKeyFile(files.key, files.passphraseFile)};
     if (X509_check_private_key(issuer.certificate.get(), issuer.key.get()) != 1) {
         ERR_clear_error();
-        throw Failure(EX_CONFIG, foundation::format("the key in %@ is not the one of the certificate in %@",
-                                                    files.key, files.certificate));
+        throw Failure(EX_CONFIG, values::format("the key in %@ is not the one of the certificate in %@",
+                                                files.key, files.certificate));
     }
     return issuer;
 }
@@ -87,7 +87,7 @@ Identity issueSigner(const IssuerFiles& intermediate, Date now, std::string_view
     return toPem(issueCertificate(signerProfile(), &issuer, now), passphrase);
 }
 
-std::string certifySigner(const IssuerFiles& intermediate, foundation::ByteView publicKey, Date now) {
+std::string certifySigner(const IssuerFiles& intermediate, base::ByteView publicKey, Date now) {
     const IssuedCertificate issuer = readIssuer(intermediate);
     const unsigned char* der = octets(publicKey);
     const KeyHandle key(d2i_PUBKEY(nullptr, &der, static_cast<long>(publicKey.size())));

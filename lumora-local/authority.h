@@ -14,8 +14,8 @@
 #include <utility>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/date.h"
+#include "base/bytes.h"
+#include "values/date.h"
 
 namespace pinwell::lumora {
 
@@ -47,7 +47,7 @@ struct Authority {
 /// renews them at an isolated site. `hosts` are canonical (endpoint.h) and not empty; the first is the
 /// server's common name. The keys are encrypted unless `passphrase` is empty. Throws Failure if the
 /// cryptographic library fails.
-Authority createAuthority(const std::vector<std::string>& hosts, foundation::Date now,
+Authority createAuthority(const std::vector<std::string>& hosts, values::Date now,
                           std::string_view passphrase = {});
 
 /// The paths of an issuer's certificate and key.
@@ -58,22 +58,21 @@ struct IssuerFiles {
 };
 
 /// A fresh signer. Throws Failure, also if key and certificate of the issuer do not belong together.
-Identity issueSigner(const IssuerFiles& intermediate, foundation::Date now, std::string_view passphrase);
+Identity issueSigner(const IssuerFiles& intermediate, values::Date now, std::string_view passphrase);
 
 /// A signer's certificate, in PEM, for the key with this SubjectPublicKeyInfo. Throws Failure.
-std::string certifySigner(const IssuerFiles& intermediate, foundation::ByteView publicKey,
-                          foundation::Date now);
+std::string certifySigner(const IssuerFiles& intermediate, base::ByteView publicKey, values::Date now);
 
 /// A fresh server certificate. Throws Failure as issueSigner does.
-Identity issueServer(const IssuerFiles& root, const std::vector<std::string>& hosts, foundation::Date now,
+Identity issueServer(const IssuerFiles& root, const std::vector<std::string>& hosts, values::Date now,
                      std::string_view passphrase);
 
 /// An authority for certificates of clients only, separate from the service's own. The key is encrypted
 /// unless `passphrase` is empty.
-Identity createClientAuthority(foundation::Date now, std::string_view passphrase);
+Identity createClientAuthority(values::Date now, std::string_view passphrase);
 
 /// A client's certificate (clientAuth) with this common name, and its key in the clear.
-Identity issueClient(const IssuerFiles& authority, const std::string& commonName, foundation::Date now);
+Identity issueClient(const IssuerFiles& authority, const std::string& commonName, values::Date now);
 
 /// A fresh signer's key, with a certificate request (RFC 2986, PEM) instead of the certificate.
 Identity requestSigner(std::string_view passphrase);

@@ -10,21 +10,21 @@
 #include <system_error>
 #include <vector>
 
-#include "foundation/file_io.h"
-#include "foundation/format.h"
+#include "base/file_io.h"
 #include "lumora-local/event.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/sqlite_store.h"
 #include "lumora-local/sqlite_tables.h"
 #include "lumora-local/upkeep.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
 namespace fs = std::filesystem;
-using foundation::Data;
-using foundation::format;
+using base::Data;
+using values::format;
 
 constexpr std::size_t kMaximumBackedUpFile = std::size_t{1024} * 1024;
 constexpr std::size_t kMaximumBackedUpFiles = 10'000;
@@ -75,11 +75,11 @@ void archiveFiles(SQLite::Database& database, const std::string& root) {
     SQLite::Transaction transaction(database);
     database.exec("CREATE TABLE sqlar (name TEXT PRIMARY KEY, mode INT, mtime INT, sz INT, data BLOB)");
     SQLite::Statement row(database, "INSERT INTO sqlar VALUES (?, ?, ?, ?, ?)");
-    const std::int64_t now = foundation::Date::now().seconds;
+    const std::int64_t now = values::Date::now().seconds;
     // service.json first: the files that it names are there before it, and stay.
     std::vector<std::string> names{"service/service.json"};
     const Data settings = [&] {
-        auto bytes = foundation::readSmallFile(root + "/" + names.front(), kMaximumBackedUpFile);
+        auto bytes = base::readSmallFile(root + "/" + names.front(), kMaximumBackedUpFile);
         if (!bytes) throw Failure(EX_NOINPUT, bytes.error().localizedDescription());
         return *std::move(bytes);
     }();
@@ -95,7 +95,7 @@ void archiveFiles(SQLite::Database& database, const std::string& root) {
     add(names.front(), settings);
     for (const std::string& name : filesOf(root)) {
         if (name == names.front()) continue;
-        const auto bytes = foundation::readSmallFile(root + "/" + name, kMaximumBackedUpFile);
+        const auto bytes = base::readSmallFile(root + "/" + name, kMaximumBackedUpFile);
         if (!bytes) throw Failure(EX_NOINPUT, bytes.error().localizedDescription());
         add(name, *bytes);
     }
@@ -116,7 +116,7 @@ class UnfinishedFile {
     const std::string& path() const noexcept { return path_; }
 
     void publish() const {
-        const foundation::FileDescriptor file(::open(path_.c_str(), O_RDONLY | O_CLOEXEC));
+        const base::FileDescriptor file(::open(path_.c_str(), O_RDONLY | O_CLOEXEC));
         if (!file || ::fsync(file.get()) != 0) fail(EX_IOERR, "flush");
         // Neither call replaces a file made by another process; some file systems have only one of them.
         if (::renameat2(AT_FDCWD, path_.c_str(), AT_FDCWD, finalPath_.c_str(), RENAME_NOREPLACE) != 0 &&

@@ -1,6 +1,6 @@
 #include <ctime>
 
-#include "foundation/file_io.h"
+#include "base/file_io.h"
 #include "lumora-local/authority.h"
 #include "lumora-local/certificates.h"
 
@@ -16,8 +16,7 @@ CertificateHandle readCertificateFile(const std::string& path) {
 }
 
 std::vector<CertificateHandle> readCertificateFiles(const std::string& path, std::size_t limit) {
-    const foundation::Result<foundation::Data> bytes =
-        foundation::readSmallFile(path, kMaximumCertificateFile);
+    const base::Result<base::Data> bytes = base::readSmallFile(path, kMaximumCertificateFile);
     if (!bytes) throw Failure(EX_NOINPUT, bytes.error().localizedDescription());
     const BioHandle pem(BIO_new_mem_buf(bytes->data(), static_cast<int>(bytes->size())));
     require(pem != nullptr, "read a PEM file");
@@ -29,7 +28,7 @@ std::vector<CertificateHandle> readCertificateFiles(const std::string& path, std
     }
     ERR_clear_error();
     if (certificates.empty()) {
-        throw Failure(EX_CONFIG, foundation::format("there is no certificate in %@", path));
+        throw Failure(EX_CONFIG, values::format("there is no certificate in %@", path));
     }
     return certificates;
 }
@@ -73,13 +72,12 @@ std::optional<std::string> faultOfIssue(X509* certificate, X509* issuer) {
     const bool signedByIt = named && key != nullptr && X509_verify(certificate, key) == 1;
     ERR_clear_error();
     if (signedByIt) return std::nullopt;
-    return foundation::format("%@ is not issued by %@", nameOf(certificate), nameOf(issuer));
+    return values::format("%@ is not issued by %@", nameOf(certificate), nameOf(issuer));
 }
 
 std::optional<std::string> faultOfSignerChain(const std::vector<CertificateHandle>& chain) {
     if (chain.size() != kChainLength) {
-        return foundation::format("it holds %zu certificates, not signer, intermediate and root",
-                                  chain.size());
+        return values::format("it holds %zu certificates, not signer, intermediate and root", chain.size());
     }
     X509* signer = chain[0].get();
     X509* intermediate = chain[1].get();

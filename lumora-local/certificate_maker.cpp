@@ -5,13 +5,13 @@
 
 #include <ctime>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "lumora-local/certificates.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Date;
+using values::Date;
 
 constexpr std::int64_t kDay = 24 * 60 * 60;
 constexpr std::int64_t kValidity = 3653 * kDay;
@@ -26,9 +26,9 @@ void releaseExtensions(STACK_OF(X509_EXTENSION) * list) {
     sk_X509_EXTENSION_pop_free(list, X509_EXTENSION_free);
 }
 
-using RequestHandle = foundation::Handle<X509_REQ, X509_REQ_free>;
-using ExtensionListHandle = foundation::Handle<STACK_OF(X509_EXTENSION), releaseExtensions>;
-using OctetStringHandle = foundation::Handle<ASN1_OCTET_STRING, ASN1_OCTET_STRING_free>;
+using RequestHandle = base::Handle<X509_REQ, X509_REQ_free>;
+using ExtensionListHandle = base::Handle<STACK_OF(X509_EXTENSION), releaseExtensions>;
+using OctetStringHandle = base::Handle<ASN1_OCTET_STRING, ASN1_OCTET_STRING_free>;
 
 void setSerialNumber(X509* certificate) {
     const NumberHandle number(BN_new());
@@ -41,7 +41,7 @@ void setSerialNumber(X509* certificate) {
 
 void addNames(X509_NAME* subject, const std::string& commonName) {
     const auto add = [&](const char* field, std::string_view text) {
-        const foundation::ByteView bytes = foundation::asBytes(text);
+        const base::ByteView bytes = base::asBytes(text);
         require(X509_NAME_add_entry_by_txt(subject, field, MBSTRING_UTF8, octets(bytes),
                                            static_cast<int>(bytes.size()), -1, 0) == 1,
                 "set a subject");

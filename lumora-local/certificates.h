@@ -11,8 +11,8 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/date.h"
 #include "lumora-local/openssl_handles.h"
+#include "values/date.h"
 
 namespace pinwell::lumora {
 
@@ -64,7 +64,7 @@ KeyHandle makeKey(KeyKind kind);
 /// A certificate for the key `subject`, signed by `issuer`. The public half of the key is enough. Otherwise
 /// like issueCertificate.
 CertificateHandle certifyKey(const CertificateProfile& profile, EVP_PKEY* subject,
-                             const IssuedCertificate& issuer, foundation::Date now);
+                             const IssuedCertificate& issuer, values::Date now);
 
 /// A certification request (RFC 2986) in PEM for `profile`, signed by the key.
 std::string requestCertificate(const CertificateProfile& profile, EVP_PKEY* key);
@@ -73,6 +73,6 @@ std::string requestCertificate(const CertificateProfile& profile, EVP_PKEY* key)
 /// before `now` (clocks differ) for ten years, because nobody renews it at an isolated site. Throws Failure
 /// if the cryptographic library fails.
 IssuedCertificate issueCertificate(const CertificateProfile& profile, const IssuedCertificate* issuer,
-                                   foundation::Date now);
+                                   values::Date now);
 
 }  // namespace pinwell::lumora

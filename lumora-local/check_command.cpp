@@ -5,9 +5,8 @@
 #include <memory>
 #include <system_error>
 
-#include "foundation/format.h"
-#include "foundation/markup.h"
-#include "foundation/platform_directory.h"
+#include "base/text.h"
+#include "config/platform_directory.h"
 #include "lumora-local/access_list.h"
 #include "lumora-local/certificates.h"
 #include "lumora-local/event.h"
@@ -16,12 +15,13 @@
 #include "lumora-local/rfc3339.h"
 #include "lumora-local/service_store.h"
 #include "lumora-local/upkeep.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Date;
-using foundation::format;
+using values::Date;
+using values::format;
 
 constexpr std::int64_t kHour = 3600;
 constexpr std::int64_t kCentury = std::int64_t{36525} * 24 * kHour;
@@ -77,7 +77,7 @@ class Inspection {
     }
 
     void readRoots() {
-        const foundation::PlatformDirectory platform(directory_.platformPath());
+        const config::PlatformDirectory platform(directory_.platformPath());
         for (const std::string& path : platform.rootCertificateFiles())
             roots_.push_back(readCertificateFile(path));
         require(!roots_.empty(), "it holds no root");
@@ -202,7 +202,7 @@ std::string describeFindings(const std::vector<Finding>& findings) {
         const char* word = finding.condition == Condition::fine    ? "ok"
                            : finding.condition == Condition::wrong ? "wrong"
                                                                    : "soon";
-        text += format("%s\t%s\t%s\n", word, finding.subject, foundation::escapeForDisplay(finding.text));
+        text += format("%s\t%s\t%s\n", word, finding.subject, base::escapeForDisplay(finding.text));
     }
     return text;
 }

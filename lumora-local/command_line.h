@@ -1,5 +1,5 @@
 // What all commands share: the service that a command is about, the user's name, and the output. Texts for
-// the output are escaped already (foundation::format does that).
+// the output are escaped already (values::format does that).
 #pragma once
 
 #include <cstdio>

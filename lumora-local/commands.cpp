@@ -3,23 +3,23 @@
 #include <filesystem>
 #include <system_error>
 
-#include "foundation/bytes.h"
-#include "foundation/format.h"
-#include "foundation/json.h"
-#include "foundation/markup.h"
-#include "foundation/value.h"
+#include "base/bytes.h"
+#include "base/text.h"
 #include "lumora-local/failure.h"
+#include "values/format.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Array;
-using foundation::Data;
-using foundation::Dictionary;
-using foundation::format;
-using foundation::Value;
+using base::Data;
+using values::Array;
+using values::Dictionary;
+using values::format;
+using values::Value;
 
-SignedRecord signRecord(const TicketSigner& signer, Record record, foundation::Date now) {
+SignedRecord signRecord(const TicketSigner& signer, Record record, values::Date now) {
     record.signedAt = now;
     Data ticket = signer.makeTicket({record.hashes, record.revoked, record.signedAt});
     if (ticket.size() > kMaximumInlineTicketSize) record.asAsset = true;
@@ -76,10 +76,10 @@ Record recordOf(const Registry& registry, const std::string& subject) {
 Value asValue(const Record& record) {
     Array hashes;
     for (const CodeHash& hash : record.hashes) {
-        hashes.push_back(Dictionary{{"algorithm", hash.algorithm}, {"hash", foundation::toHex(hash.hash)}});
+        hashes.push_back(Dictionary{{"algorithm", hash.algorithm}, {"hash", base::toHex(hash.hash)}});
     }
     return Dictionary{{"recordName", record.name},
-                      {"label", foundation::escapeForDisplay(record.label)},
+                      {"label", base::escapeForDisplay(record.label)},
                       {"revoked", record.revoked},
                       {"asset", record.asAsset},
                       {"signatureTime", record.signedAt.seconds},
@@ -145,7 +145,7 @@ std::string describeRecords(const std::vector<Record>& records) {
     for (const Record& record : records) {
         text += format("%s\t%@\t%s\t%@\t%zu\t%s\n", record.revoked ? "revoked" : "valid", record.name,
                        record.asAsset ? "asset" : "inline", record.signedAt, record.hashes.size(),
-                       foundation::escapeForDisplay(record.label));
+                       base::escapeForDisplay(record.label));
     }
     return text;
 }
@@ -153,9 +153,9 @@ std::string describeRecords(const std::vector<Record>& records) {
 std::string recordsAsJson(const std::vector<Record>& records) {
     Array values;
     for (const Record& record : records) values.push_back(asValue(record));
-    const auto document = foundation::serializeJSON(Dictionary{{"records", std::move(values)}});
+    const auto document = values::serializeJSON(Dictionary{{"records", std::move(values)}});
     if (!document) throw Failure(EX_SOFTWARE, document.error().localizedDescription());
-    return foundation::toString(*document) + "\n";
+    return base::toString(*document) + "\n";
 }
 
 }  // namespace pinwell::lumora

@@ -5,10 +5,10 @@
 #include <string>
 #include <vector>
 
-#include "foundation/date.h"
 #include "lumora-local/artefact_hasher.h"
 #include "lumora-local/record_store.h"
 #include "lumora-local/ticket_maker.h"
+#include "values/date.h"
 
 namespace pinwell::lumora {
 
@@ -22,7 +22,7 @@ struct Registry {
     ArtefactHasher& hasher;
     Environment environment = Environment::production;
     std::string actor;  // for the log
-    std::function<foundation::Date()> now = foundation::Date::now;
+    std::function<values::Date()> now = values::Date::now;
 };
 
 /// The subjects and options of issuing.
@@ -62,7 +62,7 @@ struct DescribedArtefact {
 /// The result of one change.
 struct Change {
     Event event;
-    foundation::Data ticket;
+    base::Data ticket;
 };
 
 /// Issues a ticket for one artefact by its description. If the occasion's request is a repetition, the result

@@ -10,9 +10,9 @@
 #include <chrono>
 #include <exception>
 
-#include "foundation/date.h"
-#include "foundation/format.h"
-#include "foundation/process.h"
+#include "runtime/process.h"
+#include "values/date.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -20,8 +20,8 @@ namespace {
 namespace asio = boost::asio;
 namespace beast = boost::beast;
 namespace http = boost::beast::http;
-using foundation::format;
 using std::chrono::milliseconds;
+using values::format;
 using Tcp = asio::ip::tcp;
 
 constexpr const char* kRequestIdentifierHeader = "X-Ostrel-Request-UUID";
@@ -126,7 +126,7 @@ void Connection::logFailedHandshake(ErrorCode error) const {
 /// the authorities that it was judged by.
 bool Connection::mayGoOn() const {
     if (!client_) return true;
-    return foundation::Date::now() <= client_->validUntil && tls_ == context_.tls.current();
+    return values::Date::now() <= client_->validUntil && tls_ == context_.tls.current();
 }
 
 void Connection::awaitRequest() {
@@ -268,7 +268,7 @@ void Connection::count(const Answer& answer) const {
 
 void Connection::log(const Answer& answer, std::size_t size, const std::string& identifier) const {
     RequestEntry entry;
-    entry.time = foundation::Date::now();
+    entry.time = values::Date::now();
     entry.peer = peer_;
     if (client_) entry.client = client_->name;
     if (headSeen_) {
@@ -292,7 +292,7 @@ void Connection::respond(const Answer& answer, bool bodyLeftBehind) {
     closeAfterwards_ = closeAfterwards_ || bodyLeftBehind || context_.stopping;
     const HttpRequest& request = parser_->get();
     const unsigned version = headSeen_ ? request.version() : 11;
-    const std::string identifier = foundation::globallyUniqueString();
+    const std::string identifier = runtime::globallyUniqueString();
     const bool withoutBody = request.method() == http::verb::head;
     const auto done = [self = shared_from_this()](ErrorCode error, std::size_t) { self->onWritten(error); };
 

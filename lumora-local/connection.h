@@ -18,7 +18,7 @@
 #include <optional>
 #include <string>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "lumora-local/connection_table.h"
 #include "lumora-local/http_service.h"
 #include "lumora-local/server.h"
@@ -130,7 +130,7 @@ class Connection : public std::enable_shared_from_this<Connection> {
     boost::beast::flat_buffer buffer_;
     std::optional<Parser> parser_;
     std::optional<Message> message_;
-    std::shared_ptr<const foundation::Data> asset_;
+    std::shared_ptr<const base::Data> asset_;
     std::optional<Response> assetMessage_;
     std::chrono::steady_clock::time_point begun_;  // this request
     std::size_t received_ = 0;                     // bytes of this request

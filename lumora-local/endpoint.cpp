@@ -13,15 +13,15 @@
 #include <charconv>
 #include <system_error>
 
-#include "foundation/format.h"
-#include "foundation/handle.h"
+#include "base/handle.h"
 #include "lumora-local/failure.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::FileDescriptor;
-using foundation::format;
+using base::FileDescriptor;
+using values::format;
 
 constexpr std::size_t kMaximumHostLength = 253;
 constexpr std::size_t kMaximumLabelLength = 63;
@@ -126,7 +126,7 @@ namespace {
 
 constexpr int kBacklog = 1024;  // the kernel cuts it to its own limit
 
-using AddressList = foundation::Handle<addrinfo, ::freeaddrinfo>;
+using AddressList = base::Handle<addrinfo, ::freeaddrinfo>;
 
 AddressList resolve(const Endpoint& endpoint) {
     addrinfo hints{};

@@ -7,7 +7,7 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/file_io.h"
+#include "base/handle.h"
 
 namespace pinwell::lumora {
 
@@ -60,11 +60,11 @@ class Listener {
     bool isIPv6() const noexcept { return isIPv6_; }
 
     /// Hands the socket to the caller. It is non-blocking.
-    foundation::FileDescriptor release() noexcept { return std::move(socket_); }
+    base::FileDescriptor release() noexcept { return std::move(socket_); }
 
   private:
     Endpoint endpoint_;
-    foundation::FileDescriptor socket_;
+    base::FileDescriptor socket_;
     bool isIPv6_ = false;
 };
 

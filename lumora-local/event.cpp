@@ -3,19 +3,19 @@
 #include <array>
 #include <nlohmann/json.hpp>
 
-#include "foundation/bytes.h"
-#include "foundation/format.h"
-#include "foundation/markup.h"
+#include "base/bytes.h"
+#include "base/text.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/record_store.h"
 #include "lumora-local/rfc3339.h"
 #include "lumora-local/sha256.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::escapeForDisplay;
-using foundation::format;
+using base::escapeForDisplay;
+using values::format;
 
 constexpr std::array kActions{Action::issued, Action::reissued, Action::revoked, Action::reinstated,
                               Action::refused};
@@ -106,7 +106,7 @@ std::string hashOf(const Event& event) {
     append(text, reasonText(event));
     append(text, event.comment);
     append(text, event.ticket);
-    return foundation::toHex(sha256(foundation::asBytes(text)));
+    return base::toHex(sha256(base::asBytes(text)));
 }
 
 bool isBlank(std::string_view comment) {

@@ -23,8 +23,8 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/date.h"
 #include "lumora-local/record_name.h"
+#include "values/date.h"
 
 namespace pinwell::lumora {
 
@@ -49,7 +49,7 @@ std::optional<Reason> parseReason(std::string_view text);
 std::vector<std::string> reasonNames();
 
 struct Event {
-    foundation::Date time;
+    values::Date time;
     std::string actor;
     Action action = Action::issued;
     Environment environment = Environment::production;

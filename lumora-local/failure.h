@@ -9,7 +9,7 @@
 namespace pinwell::lumora {
 
 /// Leaves an operation that cannot be carried out; caught once, in main. The text is one line, already
-/// escaped for a terminal (foundation::format does that). The exit status is one of <sysexits.h>.
+/// escaped for a terminal (values::format does that). The exit status is one of <sysexits.h>.
 class Failure : public std::runtime_error {
   public:
     Failure(int exitStatus, const std::string& text) : std::runtime_error(text), exitStatus_(exitStatus) {}

@@ -9,17 +9,17 @@
 #include <filesystem>
 #include <system_error>
 
-#include "foundation/file_io.h"
-#include "foundation/format.h"
-#include "foundation/process.h"
+#include "base/handle.h"
 #include "lumora-local/failure.h"
+#include "runtime/process.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteView;
-using foundation::FileDescriptor;
-using foundation::format;
+using base::ByteView;
+using base::FileDescriptor;
+using values::format;
 
 /// Repeats a call while a signal interrupts it.
 template <class Call>
@@ -103,7 +103,7 @@ void flushDirectory(const std::string& path) {
 
 std::string temporarySiblingOf(const std::string& path) {
     const std::filesystem::path file(path);
-    const std::string name = "." + file.filename().string() + "." + foundation::globallyUniqueString();
+    const std::string name = "." + file.filename().string() + "." + runtime::globallyUniqueString();
     return (file.parent_path() / name).string();
 }
 

@@ -5,18 +5,18 @@
 
 #include <string>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::lumora {
 
 /// Makes a new file, and flushes it to the disk before it returns. `mode` is subject to the umask. Throws
 /// Failure (EX_CANTCREAT if it cannot be made, EX_IOERR if it cannot be written). Then no new file
 /// remains.
-void writeNewFile(const std::string& path, foundation::ByteView contents, mode_t mode);
+void writeNewFile(const std::string& path, base::ByteView contents, mode_t mode);
 
 /// Replaces the file at `path` by `contents`, by one rename of a flushed sibling. If it throws Failure, the
 /// old file is unchanged.
-void replaceFile(const std::string& path, foundation::ByteView contents, mode_t mode);
+void replaceFile(const std::string& path, base::ByteView contents, mode_t mode);
 
 /// Makes a new directory. Throws Failure.
 void makeDirectory(const std::string& path, mode_t mode);

@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "foundation/utf8.h"
+#include "base/text.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -19,8 +19,7 @@ std::optional<std::string> decodedPart(std::string_view part) {
     std::string text(part);
     std::replace(text.begin(), text.end(), '+', ' ');
     std::optional<std::string> decoded = percentDecoded(text);
-    if (!decoded || decoded->find('\0') != std::string::npos || !foundation::isUTF8(*decoded))
-        return std::nullopt;
+    if (!decoded || decoded->find('\0') != std::string::npos || !base::isUTF8(*decoded)) return std::nullopt;
     return decoded;
 }
 

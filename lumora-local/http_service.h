@@ -9,7 +9,7 @@
 #include <utility>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "lumora-local/service_counts.h"
 
 namespace pinwell::lumora {
@@ -32,8 +32,7 @@ struct Answer {
     int status = 200;
     std::string contentType = "application/json";
     std::string body;
-    std::shared_ptr<const foundation::Data>
-        asset;  // used instead of `body`; downloads of one ticket share it
+    std::shared_ptr<const base::Data> asset;  // used instead of `body`; downloads of one ticket share it
     std::vector<std::pair<std::string, std::string>> headers;
     std::vector<std::string> records;   // the looked-up names, for the log
     std::size_t recordsFound = 0;       // of them

@@ -2,9 +2,7 @@
 #include <filesystem>
 #include <system_error>
 
-#include "foundation/format.h"
-#include "foundation/platform_directory.h"
-#include "foundation/value.h"
+#include "config/platform_directory.h"
 #include "lumora-local/authority.h"
 #include "lumora-local/certificates.h"
 #include "lumora-local/failure.h"
@@ -13,14 +11,16 @@
 #include "lumora-local/rfc3339.h"
 #include "lumora-local/tls_context.h"
 #include "lumora-local/upkeep.h"
+#include "values/format.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Array;
-using foundation::Date;
-using foundation::Dictionary;
-using foundation::format;
+using values::Array;
+using values::Date;
+using values::Dictionary;
+using values::format;
 
 constexpr mode_t kCertificateFileMode = 0644;
 constexpr mode_t kKeyFileMode = 0600;
@@ -64,7 +64,7 @@ class NewFiles {
     }
 
     void writeAt(const std::string& path, const std::string& contents, mode_t mode) {
-        writeNewFile(path, foundation::asBytes(contents), mode);
+        writeNewFile(path, base::asBytes(contents), mode);
         paths_.push_back(path);
     }
 
@@ -158,7 +158,7 @@ RotationReport requestNextSigner(const ServiceDirectory& directory, const std::s
 void publishRoot(const ServiceDirectory& directory, X509* root, const std::string& name, NewFiles& files,
                  RotationReport& report) {
     for (const std::string& path :
-         foundation::PlatformDirectory(directory.platformPath()).rootCertificateFiles()) {
+         config::PlatformDirectory(directory.platformPath()).rootCertificateFiles()) {
         if (X509_cmp(readCertificateFile(path).get(), root) == 0) return;
     }
     const std::string path = directory.platformPath() + "/roots/" + name + ".pem";
@@ -270,10 +270,9 @@ constexpr mode_t kFolderMode = 0700;
 /// Certificate and key under these names, both or none.
 void writePair(const std::string& folder, const std::string& name, const Identity& identity) {
     PendingDirectory pending(folder, kFolderMode);
-    writeNewFile(pending.path() + "/" + name + ".pem", foundation::asBytes(identity.certificate),
+    writeNewFile(pending.path() + "/" + name + ".pem", base::asBytes(identity.certificate),
                  kCertificateFileMode);
-    writeNewFile(pending.path() + "/" + name + ".key", foundation::asBytes(identity.privateKey),
-                 kKeyFileMode);
+    writeNewFile(pending.path() + "/" + name + ".key", base::asBytes(identity.privateKey), kKeyFileMode);
     flushDirectory(pending.path());
     pending.publish();
 }
@@ -283,7 +282,7 @@ bool exists(const std::string& path) {
     return std::filesystem::exists(path, ignored);
 }
 
-IssuerFiles requireAuthority(const ServiceDirectory& directory, foundation::Date now) {
+IssuerFiles requireAuthority(const ServiceDirectory& directory, values::Date now) {
     const std::string folder = directory.servicePath("clients");
     if (!exists(clientAuthorityPath(directory))) {
         Passphrase passphrase;
@@ -305,7 +304,7 @@ std::string clientAuthorityPath(const ServiceDirectory& directory) {
 }
 
 void makeClientCertificate(const ServiceDirectory& directory, const std::string& name,
-                           const std::string& folder, foundation::Date now) {
+                           const std::string& folder, values::Date now) {
     if (!canNameAClient(name)) {
         throw Failure(EX_USAGE, format("%@ is not a client's name: 1 to %zu bytes without control characters",
                                        name, kMaximumClientName));

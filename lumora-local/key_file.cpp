@@ -13,11 +13,10 @@
 #include <span>
 #include <utility>
 
-#include "foundation/error.h"
-#include "foundation/file_io.h"
-#include "foundation/format.h"
-#include "foundation/secret_file.h"
+#include "base/error.h"
+#include "base/file_io.h"
 #include "lumora-local/failure.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -26,7 +25,7 @@ constexpr std::string_view kCredentialScheme = "credential:";
 
 /// The value, or the Failure (EX_NOINPUT) of a secret that cannot be read.
 template <class T>
-T secretOf(foundation::Result<T> result) {
+T secretOf(base::Result<T> result) {
     if (!result) throw Failure(EX_NOINPUT, result.error().localizedDescription());
     return *std::move(result);
 }
@@ -39,19 +38,19 @@ Passphrase::~Passphrase() {
 
 void Passphrase::read(const std::string& place) {
     const std::string path = pathOfPassphrase(place);
-    auto opened = foundation::openRegularFile(path, O_RDONLY);
+    auto opened = base::openRegularFile(path, O_RDONLY);
     if (!opened && (opened.error().code() == EISDIR || opened.error().code() == EINVAL))
-        throw Failure(EX_CONFIG, foundation::format("the passphrase file %@ is no regular file", path));
+        throw Failure(EX_CONFIG, values::format("the passphrase file %@ is no regular file", path));
     const auto file = secretOf(std::move(opened));
     const std::size_t length =
-        secretOf(foundation::readSecret(file.descriptor, path, std::as_writable_bytes(std::span(text_))));
+        secretOf(base::readSecret(file.descriptor, path, std::as_writable_bytes(std::span(text_))));
     const auto* const end =
         std::find(text_.begin(), text_.begin() + static_cast<std::ptrdiff_t>(length), '\n');
     length_ = static_cast<std::size_t>(end - text_.begin());
     if (length_ > 0 && text_.at(length_ - 1) == '\r') --length_;
     if (length_ == 0 || length_ > kMaximumPassphraseLength) {
-        throw Failure(EX_CONFIG, foundation::format("the passphrase in %@ has %s", path,
-                                                    length_ == 0 ? "no characters" : "too many characters"));
+        throw Failure(EX_CONFIG, values::format("the passphrase in %@ has %s", path,
+                                                length_ == 0 ? "no characters" : "too many characters"));
     }
 }
 
@@ -63,12 +62,12 @@ std::string pathOfPassphrase(const std::string& place) {
     if (!isCredential(place)) return place;
     const std::string name = place.substr(kCredentialScheme.size());
     if (name.empty() || name == "." || name == ".." || name.find('/') != std::string::npos) {
-        throw Failure(EX_CONFIG, foundation::format("%@ is not the name of a credential", place));
+        throw Failure(EX_CONFIG, values::format("%@ is not the name of a credential", place));
     }
     const char* directory = std::getenv("CREDENTIALS_DIRECTORY");
     if (directory == nullptr || *directory == '\0') {
         throw Failure(EX_CONFIG,
-                      foundation::format("%@: there is no CREDENTIALS_DIRECTORY, which systemd sets", place));
+                      values::format("%@: there is no CREDENTIALS_DIRECTORY, which systemd sets", place));
     }
     return std::string(directory) + "/" + name;
 }
@@ -77,9 +76,9 @@ namespace {
 
 constexpr std::size_t kMaximumKeyFile = std::size_t{64} * 1024;
 
-using PrivateKeyInfoHandle = foundation::Handle<PKCS8_PRIV_KEY_INFO, PKCS8_PRIV_KEY_INFO_free>;
-using AlgorithmHandle = foundation::Handle<X509_ALGOR, X509_ALGOR_free>;
-using EncryptedKeyHandle = foundation::Handle<X509_SIG, X509_SIG_free>;
+using PrivateKeyInfoHandle = base::Handle<PKCS8_PRIV_KEY_INFO, PKCS8_PRIV_KEY_INFO_free>;
+using AlgorithmHandle = base::Handle<X509_ALGOR, X509_ALGOR_free>;
+using EncryptedKeyHandle = base::Handle<X509_SIG, X509_SIG_free>;
 
 // RFC 7914: 16 MiB for each guess, the library's default maximum.
 constexpr int kSaltSize = 16;
@@ -114,8 +113,8 @@ int givePassphrase(char* buffer, int size, int, void* context) {
 }  // namespace
 
 KeyHandle readKeyFile(const std::string& path, const std::string& passphraseFile) {
-    foundation::WipedRoom<kMaximumKeyFile + 1> room;
-    const auto length = static_cast<int>(secretOf(foundation::readSecretFile(path, room.bytes())));
+    base::WipedRoom<kMaximumKeyFile + 1> room;
+    const auto length = static_cast<int>(secretOf(base::readSecretFile(path, room.bytes())));
     // Reads from the buffer itself, without a copy.
     const BioHandle pem(BIO_new_mem_buf(room.bytes().data(), length));
     require(pem != nullptr, "read a PEM file");
@@ -125,13 +124,12 @@ KeyHandle readKeyFile(const std::string& path, const std::string& passphraseFile
     if (key == nullptr && request.asked) {
         ERR_clear_error();
         if (passphraseFile.empty()) {
-            throw Failure(EX_CONFIG,
-                          foundation::format("the key in %@ is encrypted, and service.json names no "
-                                             "\"passphraseFile\"",
-                                             path));
+            throw Failure(EX_CONFIG, values::format("the key in %@ is encrypted, and service.json names no "
+                                                    "\"passphraseFile\"",
+                                                    path));
         }
-        throw Failure(EX_CONFIG, foundation::format("the passphrase in %@ does not open the key in %@",
-                                                    passphraseFile, path));
+        throw Failure(EX_CONFIG, values::format("the passphrase in %@ does not open the key in %@",
+                                                passphraseFile, path));
     }
     require(key != nullptr, "read the key in " + path);
     return key;

@@ -4,19 +4,19 @@
 #include <span>
 #include <unordered_map>
 
-#include "foundation/base64.h"
-#include "foundation/format.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
+#include "base/text.h"
+#include "values/format.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Array;
-using foundation::Data;
-using foundation::Dictionary;
-using foundation::format;
-using foundation::Value;
+using base::Data;
+using values::Array;
+using values::Dictionary;
+using values::format;
+using values::Value;
 
 constexpr std::string_view kDatabasePrefix = "/database/1/";
 constexpr std::string_view kLookupSuffix = "/public/records/lookup";
@@ -31,9 +31,9 @@ constexpr std::size_t kMaximumFileNameLength = 200;
 constexpr std::size_t kNamesAtOnce = 16;
 
 std::string json(const Value& value) {
-    const foundation::Result<Data> document = foundation::serializeJSON(value);
+    const base::Result<Data> document = values::serializeJSON(value);
     // The values are our own text, or text from a JSON parser.
-    return document ? foundation::toString(*document) : std::string("{}");
+    return document ? base::toString(*document) : std::string("{}");
 }
 
 Answer notFound() {
@@ -88,7 +88,7 @@ LookupBody badRequest(std::string_view reason) {
 }
 
 LookupBody parseLookupBody(std::string_view body) {
-    const foundation::Result<Value> document = foundation::parseJSON(foundation::asBytes(body));
+    const base::Result<Value> document = values::parseJSON(base::asBytes(body));
     if (!document) {
         return badRequest(format("The body is not JSON: %@", document.error().localizedDescription()));
     }
@@ -267,8 +267,8 @@ LookupService::Found LookupService::makeRecord(const RequestHead& head, Environm
         return std::make_shared<const KeptAnswer>(KeptAnswer{json(record)});
     };
     if (delivery && delivery->inlineTicket) {
-        auto record = share(
-            foundRecord(name, "signedTicket", "BYTES", foundation::encodeBase64(*delivery->inlineTicket)));
+        auto record =
+            share(foundRecord(name, "signedTicket", "BYTES", base::encodeBase64(*delivery->inlineTicket)));
         if (state) records_.insert(*state, environment, name, record);
         return {std::move(record), true, true};
     }

@@ -24,7 +24,7 @@
 #include <utility>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "lumora-local/answer_cache.h"
 #include "lumora-local/endpoint.h"
 #include "lumora-local/http_service.h"
@@ -89,7 +89,7 @@ class LookupService final : public HttpService {
     Found makeRecord(const RequestHead& head, Environment environment, const std::string& name,
                      const std::optional<Delivery>& delivery, std::optional<std::uint64_t> state) const;
     Answer answerAsset(std::string_view path) const;
-    std::shared_ptr<const foundation::Data> sharedAsset(const std::string& identifier) const;
+    std::shared_ptr<const base::Data> sharedAsset(const std::string& identifier) const;
     Answer answerHealth() const;
     Answer answerReadiness() const;
     std::string assetUrlTemplate(const RequestHead& head, const std::string& identifier) const;
@@ -101,7 +101,7 @@ class LookupService final : public HttpService {
     mutable AnswerCache records_;
     mutable AnswerCache answers_;  // by the bodies of their requests
     mutable std::mutex assetsMutex_;
-    mutable std::unordered_map<std::string, std::weak_ptr<const foundation::Data>> assets_;  // being sent
+    mutable std::unordered_map<std::string, std::weak_ptr<const base::Data>> assets_;  // being sent
 };
 
 }  // namespace pinwell::lumora

@@ -9,13 +9,10 @@
 #include <string>
 #include <vector>
 
+#include "base/text.h"
 #include "companion/command_line.h"
+#include "config/platform_directory.h"
 #include "crypto/crypto.h"
-#include "foundation/date.h"
-#include "foundation/format.h"
-#include "foundation/markup.h"
-#include "foundation/platform_directory.h"
-#include "foundation/process.h"
 #include "lumora-local/artefact_hasher.h"
 #include "lumora-local/command_line.h"
 #include "lumora-local/commands.h"
@@ -27,8 +24,11 @@
 #include "lumora-local/service_directory.h"
 #include "lumora-local/service_store.h"
 #include "lumora-local/upkeep.h"
+#include "runtime/process.h"
 #include "sandbox/sandbox.h"
 #include "src/confinement.h"
+#include "values/date.h"
+#include "values/format.h"
 
 namespace {
 
@@ -76,26 +76,25 @@ void runInit(const Arguments& arguments) {
     for (const std::string& host : arguments.hosts) {
         const std::optional<std::string> canonical = canonicalHost(host);
         if (!canonical || isWildcard(*canonical)) {
-            throw Failure(EX_USAGE, foundation::format("%@ is neither a host name nor an address", host));
+            throw Failure(EX_USAGE, values::format("%@ is neither a host name nor an address", host));
         }
         service.hosts.push_back(*canonical);
     }
     const std::string directoryPath = requireDirectory(arguments.directory);
-    const auto directory = ServiceDirectory::create(directoryPath, service, foundation::Date::now());
-    writeText(foundation::format(
-        "Made a record service for %@.\n"
-        "Start it:         lumora-local serve %@\n"
-        "Point pinwell at: PINWELL_PLATFORM=%@\n",
-        toString(directory.advertisedEndpoint()), directoryPath, directory.platformPath()));
+    const auto directory = ServiceDirectory::create(directoryPath, service, values::Date::now());
+    writeText(
+        values::format("Made a record service for %@.\n"
+                       "Start it:         lumora-local serve %@\n"
+                       "Point pinwell at: PINWELL_PLATFORM=%@\n",
+                       toString(directory.advertisedEndpoint()), directoryPath, directory.platformPath()));
     if (!service.rootDirectory.empty()) {
-        writeText(
-            foundation::format("The root's key:   %@/root.key (keep it on a machine without a service)\n",
-                               service.rootDirectory));
+        writeText(values::format("The root's key:   %@/root.key (keep it on a machine without a service)\n",
+                                 service.rootDirectory));
     }
     if (!service.signerRequest.empty()) {
         writeText(
-            foundation::format("Signer's request: %@; once it is certified: lumora-local certify %@ CHAIN\n",
-                               service.signerRequest, directoryPath));
+            values::format("Signer's request: %@; once it is certified: lumora-local certify %@ CHAIN\n",
+                           service.signerRequest, directoryPath));
     }
 }
 
@@ -109,11 +108,11 @@ void giveUpRights(const Arguments& arguments, const ServiceDirectory& directory)
     using sandbox::Access;
     keepSecurityLibrary();
     sandbox::Confinement rights =
-        confinementOfReading(arguments.subjects, foundation::PlatformDirectory::current());
+        confinementOfReading(arguments.subjects, config::PlatformDirectory::current());
     rights.calls = sandbox::Calls::service;
     rights.files.push_back({directory.path(), Access::write});
     addStoreRights(rights, directory);
-    rights.files.push_back({foundation::temporaryDirectory().path(), Access::write});  // of the store
+    rights.files.push_back({runtime::temporaryDirectory().path(), Access::write});  // of the store
     static_cast<void>(sandbox::confine(rights));
 }
 
@@ -167,7 +166,7 @@ void sortOutHead(Arguments& arguments) {
                         arguments.head.find_first_not_of("0123456789abcdef") == std::string::npos;
     if (isHash || arguments.head.empty()) return;
     if (!arguments.directory.empty()) {
-        throw Failure(EX_USAGE, foundation::format("%@ is not the hash of an event", arguments.head));
+        throw Failure(EX_USAGE, values::format("%@ is not the hash of an event", arguments.head));
     }
     arguments.directory = std::move(arguments.head);
     arguments.head.clear();
@@ -183,8 +182,8 @@ void runLog(Arguments& arguments) {
     if (!arguments.since.empty()) {
         query.since = parseRfc3339(arguments.since);
         if (!query.since) {
-            throw Failure(EX_USAGE, foundation::format("%@ is not a time: 2026-11-20 or 2026-11-20T19:55:00Z",
-                                                       arguments.since));
+            throw Failure(EX_USAGE, values::format("%@ is not a time: 2026-11-20 or 2026-11-20T19:55:00Z",
+                                                   arguments.since));
         }
     }
     const std::unique_ptr<RecordStore> store = openStore(openService(arguments));
@@ -195,8 +194,8 @@ void runLog(Arguments& arguments) {
         if (arguments.showsHead && arguments.head.empty()) {
             writeText(summary.head + "\n");
         } else {
-            writeText(foundation::format("%zu events, the chain is whole and ends with %s\n", summary.events,
-                                         summary.head));
+            writeText(values::format("%zu events, the chain is whole and ends with %s\n", summary.events,
+                                     summary.head));
         }
     } else if (arguments.showsHead) {
         writeText(store->headHash() + "\n");
@@ -210,16 +209,16 @@ void runMigrate(const Arguments& arguments) {
     const ServiceDirectory directory = openService(arguments);
     const Migration migration = migrate(directory, arguments.to);
     writeText(
-        foundation::format("Copied %zu records and %zu events, and compared them; the chain ends with %s.\n"
-                           "%@ names the database now; the earlier one is %@.\n"
-                           "Start the service again if it runs: it answers no lookups until then.\n",
-                           migration.records, migration.events, migration.head, directory.descriptionPath(),
-                           migration.oldDescription));
+        values::format("Copied %zu records and %zu events, and compared them; the chain ends with %s.\n"
+                       "%@ names the database now; the earlier one is %@.\n"
+                       "Start the service again if it runs: it answers no lookups until then.\n",
+                       migration.records, migration.events, migration.head, directory.descriptionPath(),
+                       migration.oldDescription));
 }
 
 void runSample(const Arguments& arguments) {
-    for (const std::string& path : writeSamples(arguments.directory, foundation::Date::now())) {
-        writeText(foundation::format("%@\n", path));
+    for (const std::string& path : writeSamples(arguments.directory, values::Date::now())) {
+        writeText(values::format("%@\n", path));
     }
 }
 
@@ -228,7 +227,7 @@ void runServe(const Arguments& arguments) {
     if (!arguments.listen.empty()) {
         options.listen = parseEndpoint(arguments.listen, kDefaultPort);
         if (!options.listen) {
-            throw Failure(EX_USAGE, foundation::format("%@ is not ADDRESS:PORT", arguments.listen));
+            throw Failure(EX_USAGE, values::format("%@ is not ADDRESS:PORT", arguments.listen));
         }
     }
     if (arguments.adminListen.empty() != arguments.clientAuthorities.empty()) {
@@ -237,7 +236,7 @@ void runServe(const Arguments& arguments) {
     if (!arguments.adminListen.empty()) {
         const auto endpoint = parseEndpoint(arguments.adminListen, kDefaultAdminPort);
         if (!endpoint) {
-            throw Failure(EX_USAGE, foundation::format("%@ is not ADDRESS:PORT", arguments.adminListen));
+            throw Failure(EX_USAGE, values::format("%@ is not ADDRESS:PORT", arguments.adminListen));
         }
         options.admin = AdminOptions{*endpoint, arguments.clientAuthorities};
     }
@@ -247,7 +246,7 @@ void runServe(const Arguments& arguments) {
     if (!arguments.metricsListen.empty()) {
         options.metricsListen = parseEndpoint(arguments.metricsListen, kDefaultMetricsPort);
         if (!options.metricsListen) {
-            throw Failure(EX_USAGE, foundation::format("%@ is not ADDRESS:PORT", arguments.metricsListen));
+            throw Failure(EX_USAGE, values::format("%@ is not ADDRESS:PORT", arguments.metricsListen));
         }
     }
 
@@ -399,7 +398,7 @@ int run(int argc, char** argv) {
 
 int main(int argc, char** argv) {
     crypto::wipeWhatOpenSSLFrees();
-    foundation::occupyStandardStreams();
+    runtime::occupyStandardStreams();
     sandbox::forbidCoreDumps();  // they would contain the keys
     // A client that has gone away is an error of one write, not the end of the service.
     std::signal(SIGPIPE, SIG_IGN);
@@ -411,7 +410,7 @@ int main(int argc, char** argv) {
         complain(failure.what());
         return failure.exitStatus();
     } catch (const std::exception& error) {
-        complain(foundation::escapeForDisplay(error.what()));
+        complain(base::escapeForDisplay(error.what()));
         return EX_SOFTWARE;
     }
 }

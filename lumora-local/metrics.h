@@ -14,10 +14,10 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/date.h"
 #include "lumora-local/endpoint.h"
 #include "lumora-local/record_store.h"
 #include "lumora-local/service_counts.h"
+#include "values/date.h"
 
 namespace pinwell::lumora {
 
@@ -25,13 +25,13 @@ inline constexpr std::string_view kMetricsContentType = "text/plain; version=0.0
 
 struct CertificateDate {
     std::string role;  // server, signer, intermediate or root
-    foundation::Date expiry;
+    values::Date expiry;
 };
 
 /// Facts about a service beside its counts.
 struct ServiceFacts {
     std::string version;
-    foundation::Date started;
+    values::Date started;
     std::vector<CertificateDate> certificates;
     std::optional<StoreFacts> store;  // `nullopt` if the records cannot be read
 };

@@ -12,26 +12,26 @@
 #include <array>
 #include <string>
 
-#include "foundation/bytes.h"
-#include "foundation/format.h"
-#include "foundation/handle.h"
+#include "base/bytes.h"
+#include "base/handle.h"
 #include "lumora-local/failure.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 
-using KeyHandle = foundation::Handle<EVP_PKEY, EVP_PKEY_free>;
-using CertificateHandle = foundation::Handle<X509, X509_free>;
-using ExtensionHandle = foundation::Handle<X509_EXTENSION, X509_EXTENSION_free>;
-using BioHandle = foundation::Handle<BIO, BIO_free_all>;
-using NumberHandle = foundation::Handle<BIGNUM, BN_free>;
-using ObjectHandle = foundation::Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
-using DigestContextHandle = foundation::Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
+using KeyHandle = base::Handle<EVP_PKEY, EVP_PKEY_free>;
+using CertificateHandle = base::Handle<X509, X509_free>;
+using ExtensionHandle = base::Handle<X509_EXTENSION, X509_EXTENSION_free>;
+using BioHandle = base::Handle<BIO, BIO_free_all>;
+using NumberHandle = base::Handle<BIGNUM, BN_free>;
+using ObjectHandle = base::Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
+using DigestContextHandle = base::Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
 
 /// The library uses unsigned characters for bytes.
-inline const unsigned char* octets(foundation::ByteView bytes) {
+inline const unsigned char* octets(base::ByteView bytes) {
     return reinterpret_cast<const unsigned char*>(bytes.data());
 }
-inline unsigned char* octets(foundation::Data& data) {
+inline unsigned char* octets(base::Data& data) {
     return reinterpret_cast<unsigned char*>(data.data());
 }
 
@@ -40,7 +40,7 @@ inline Failure openSSLFailure(std::string_view action) {
     std::array<char, 256> text{};
     ERR_error_string_n(ERR_get_error(), text.data(), text.size());
     ERR_clear_error();
-    return {EX_SOFTWARE, foundation::format("cannot %@: %@", action, std::string_view(text.data()))};
+    return {EX_SOFTWARE, values::format("cannot %@: %@", action, std::string_view(text.data()))};
 }
 
 /// Throws unless a library call has returned its success value.
@@ -50,11 +50,10 @@ inline void require(bool succeeded, std::string_view action) {
 
 /// DER by one of the library's encoders (i2d_X509 and its kind).
 template <class Object>
-foundation::Data encodeDer(int (*encoder)(Object*, unsigned char**), Object* object,
-                           std::string_view action) {
+base::Data encodeDer(int (*encoder)(Object*, unsigned char**), Object* object, std::string_view action) {
     const int length = encoder(object, nullptr);
     require(length > 0, action);
-    foundation::Data der(static_cast<std::size_t>(length));
+    base::Data der(static_cast<std::size_t>(length));
     unsigned char* end = octets(der);
     require(encoder(object, &end) == length, action);
     return der;

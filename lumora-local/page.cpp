@@ -4,17 +4,17 @@
 #include <array>
 #include <utility>
 
-#include "foundation/format.h"
-#include "foundation/markup.h"
+#include "base/text.h"
 #include "lumora-local/http_service.h"
 #include "lumora-local/rfc3339.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Date;
-using foundation::format;
-using foundation::markupText;
+using base::markupText;
+using values::Date;
+using values::format;
 
 /// Values of a form, and their texts.
 using Choices = std::array<std::pair<std::string_view, std::string_view>, 3>;

@@ -1,15 +1,15 @@
 #include <utility>
 
-#include "foundation/format.h"
 #include "lumora-local/admin_routes.h"
 #include "lumora-local/admin_service.h"
 #include "lumora-local/page.h"
 #include "lumora-local/record_name.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::format;
+using values::format;
 
 constexpr std::string_view kRecordPath = "/records/";
 

@@ -2,16 +2,16 @@
 #include <chrono>
 #include <thread>
 
-#include "foundation/format.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/postgres_store.h"
 #include "lumora-local/postgres_tables.h"
 #include "lumora-local/store_rules.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::format;
+using values::format;
 using Clock = std::chrono::steady_clock;
 
 constexpr std::chrono::seconds kChangingTime{20};
@@ -61,7 +61,7 @@ std::vector<CodeHash> hashesOf(PostgresConnection& connection, Environment envir
     std::vector<CodeHash> hashes;
     for (std::size_t row = 0; row < rows.size(); ++row) {
         hashes.push_back(
-            {static_cast<std::uint32_t>(rows.integer(row, 0)), foundation::toData(rows.bytes(row, 1))});
+            {static_cast<std::uint32_t>(rows.integer(row, 0)), base::toData(rows.bytes(row, 1))});
     }
     return hashes;
 }

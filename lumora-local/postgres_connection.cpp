@@ -8,12 +8,12 @@
 #include <cerrno>
 #include <limits>
 
-#include "foundation/format.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteView;
+using base::ByteView;
 using std::chrono::milliseconds;
 using Clock = std::chrono::steady_clock;
 
@@ -57,12 +57,12 @@ int exitStatusFor(const PostgresError& error) {
 }  // namespace
 
 Failure asFailure(const PostgresError& error) {
-    return {exitStatusFor(error), foundation::format("record store: %@", std::string_view(error.what()))};
+    return {exitStatusFor(error), values::format("record store: %@", std::string_view(error.what()))};
 }
 
 PostgresParameter PostgresParameter::bytes(ByteView bytes) {
     PostgresParameter parameter{std::nullopt};
-    parameter.value_ = foundation::toString(bytes);
+    parameter.value_ = base::toString(bytes);
     parameter.binary_ = true;
     return parameter;
 }
@@ -84,11 +84,11 @@ bool PostgresRows::isNull(std::size_t row, int column) const {
 ByteView PostgresRows::bytes(std::size_t row, int column) const {
     const char* value = PQgetvalue(result_.get(), static_cast<int>(row), column);
     const int length = PQgetlength(result_.get(), static_cast<int>(row), column);
-    return foundation::asBytes(std::string_view(value, static_cast<std::size_t>(length)));
+    return base::asBytes(std::string_view(value, static_cast<std::size_t>(length)));
 }
 
 std::string PostgresRows::text(std::size_t row, int column) const {
-    return foundation::toString(bytes(row, column));
+    return base::toString(bytes(row, column));
 }
 
 std::int64_t PostgresRows::integer(std::size_t row, int column) const {

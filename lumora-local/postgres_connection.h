@@ -15,7 +15,7 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "lumora-local/failure.h"
 
 struct pg_conn;
@@ -54,9 +54,9 @@ class PostgresParameter {
     PostgresParameter(std::int64_t number) : value_(std::to_string(number)) {}
     PostgresParameter(bool value) : value_(value ? "t" : "f") {}
     PostgresParameter(const std::optional<std::string>& text) : value_(text) {}
-    static PostgresParameter bytes(foundation::ByteView bytes);
+    static PostgresParameter bytes(base::ByteView bytes);
     static PostgresParameter bytes(std::string_view bytes) {
-        return PostgresParameter::bytes(foundation::asBytes(bytes));
+        return PostgresParameter::bytes(base::asBytes(bytes));
     }
 
     const std::optional<std::string>& value() const noexcept { return value_; }
@@ -74,7 +74,7 @@ class PostgresRows {
 
     std::size_t size() const;
     bool isNull(std::size_t row, int column) const;
-    foundation::ByteView bytes(std::size_t row, int column) const;
+    base::ByteView bytes(std::size_t row, int column) const;
     std::string text(std::size_t row, int column) const;
     std::int64_t integer(std::size_t row, int column) const;  // smallint, integer and bigint
     bool boolean(std::size_t row, int column) const;

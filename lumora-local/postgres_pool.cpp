@@ -6,8 +6,8 @@
 #include <map>
 #include <memory>
 
-#include "foundation/format.h"
 #include "lumora-local/failure.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -45,7 +45,7 @@ PostgresNeeds postgresNeeds(const std::string& url, const std::string& named) {
     const std::unique_ptr<char, Free> text(error);
     if (given == nullptr) {
         // The library's text may repeat a part of the URL, with a password in it.
-        throw Failure(EX_CONFIG, foundation::format("%@: the URL of the database cannot be read", named));
+        throw Failure(EX_CONFIG, values::format("%@: the URL of the database cannot be read", named));
     }
     std::map<std::string, std::string> values;
     addTo(values, given);

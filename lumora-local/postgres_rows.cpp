@@ -1,16 +1,17 @@
 #include <algorithm>
 
-#include "foundation/byte_reader.h"
-#include "foundation/format.h"
+#include "base/byte_io.h"
+#include "base/text.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/postgres_tables.h"
 #include "lumora-local/sha256.h"
 #include "lumora-local/store_rules.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteView;
+using base::ByteView;
 
 // The memory of a batch is this, twice for the hexadecimal form of bytes, and libpq's copy.
 constexpr std::size_t kBatchVolume = 2 * 1024 * 1024;
@@ -31,15 +32,15 @@ constexpr const char* kInsertEvents =
 std::vector<CodeHash> readHashes(ByteView bytes, const std::string& name) {
     std::vector<CodeHash> hashes;
     try {
-        foundation::ByteReader reader(bytes);
+        base::ByteReader reader(bytes);
         while (!reader.atEnd()) {
             const std::uint64_t algorithm = reader.be64("algorithm");
             const std::uint32_t length = reader.be32("length of a hash");
             hashes.push_back(
-                {static_cast<std::uint32_t>(algorithm), foundation::toData(reader.bytes(length, "hash"))});
+                {static_cast<std::uint32_t>(algorithm), base::toData(reader.bytes(length, "hash"))});
         }
-    } catch (const foundation::ShortRead&) {
-        throw Failure(EX_CONFIG, foundation::format("record store: the hashes of %@ are damaged", name));
+    } catch (const base::ShortRead&) {
+        throw Failure(EX_CONFIG, values::format("record store: the hashes of %@ are damaged", name));
     }
     return hashes;
 }
@@ -53,7 +54,7 @@ std::string nameOf(Environment environment) {
 Event readEvent(const PostgresRows& rows, std::size_t row) {
     const auto text = [&](int column) { return rows.text(row, column); };
     Event event;
-    event.time = foundation::Date{rows.integer(row, 0)};
+    event.time = values::Date{rows.integer(row, 0)};
     event.actor = text(1);
     event.action = knownName(parseAction(text(2)), "action", text(2));
     event.environment = knownName(parseEnvironment(text(3)), "environment", text(3));
@@ -72,7 +73,7 @@ Record readRecord(const PostgresRows& rows, std::size_t row) {
     record.name = rows.text(row, 0);
     record.label = rows.text(row, 1);
     record.revoked = rows.boolean(row, 2);
-    record.signedAt = foundation::Date{rows.integer(row, 3)};
+    record.signedAt = values::Date{rows.integer(row, 3)};
     record.asAsset = rows.boolean(row, 4);
     record.hashes = readHashes(rows.bytes(row, 5), record.name);
     return record;
@@ -94,7 +95,7 @@ void PostgresArray::text(std::string_view text) {
 
 void PostgresArray::bytes(ByteView bytes) {
     separate();
-    elements_ += "\"\\\\x" + foundation::toHex(bytes) + '"';
+    elements_ += "\"\\\\x" + base::toHex(bytes) + '"';
 }
 
 void PostgresArray::number(std::int64_t number) {
@@ -120,7 +121,7 @@ void PostgresBatch::add(Environment environment, const SignedRecord& entry) {
     records_[3].boolean(record.revoked);
     records_[4].number(record.signedAt.seconds);
     if (record.asAsset) {
-        records_[5].text(foundation::toHex(sha256(entry.ticket)));
+        records_[5].text(base::toHex(sha256(entry.ticket)));
     } else {
         records_[5].null();
     }
@@ -189,7 +190,7 @@ std::optional<PutOutcome> findRequest(PostgresConnection& connection, const Occa
         std::string("SELECT ") + kPostgresEventColumns + " FROM event WHERE hash = $1";
     const PostgresRows events = connection.query(sql.c_str(), {rows.text(0, 1)}, deadline);
     if (events.size() == 0) throw Failure(EX_CONFIG, "record store: the event of a request is missing");
-    return PutOutcome{readEvent(events, 0), foundation::toData(rows.bytes(0, 2))};
+    return PutOutcome{readEvent(events, 0), base::toData(rows.bytes(0, 2))};
 }
 
 void keepRequest(PostgresConnection& connection, const Occasion& occasion, const Event& event,
@@ -308,7 +309,7 @@ PostgresHead lastEventOf(PostgresConnection& connection, Deadline deadline) {
 
 void requireName(const std::string& name) {
     if (!canNameARecord(name))
-        throw Failure(EX_DATAERR, foundation::format("%@ is not the name of a record", name));
+        throw Failure(EX_DATAERR, values::format("%@ is not the name of a record", name));
 }
 
 }  // namespace pinwell::lumora

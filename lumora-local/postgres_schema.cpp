@@ -1,9 +1,9 @@
 #include <array>
 #include <string>
 
-#include "foundation/format.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/postgres_tables.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -115,8 +115,8 @@ void lockStore(PostgresConnection& connection, Deadline deadline) {
     const PostgresRows rows = connection.query("SELECT version FROM store FOR UPDATE", {}, deadline);
     const std::int64_t version = rows.size() == 1 ? rows.integer(0, 0) : 0;
     if (version != kPostgresVersion) {
-        throw Failure(EX_CONFIG, foundation::format(
-                                     "the record store has become one of version %lld; this program knows "
+        throw Failure(EX_CONFIG,
+                      values::format("the record store has become one of version %lld; this program knows "
                                      "versions up to %d",
                                      static_cast<long long>(version), kPostgresVersion));
     }

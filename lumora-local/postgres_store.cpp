@@ -3,16 +3,16 @@
 #include <algorithm>
 #include <chrono>
 
-#include "foundation/format.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/postgres_tables.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Data;
-using foundation::format;
+using base::Data;
 using std::chrono::milliseconds;
+using values::format;
 using Clock = std::chrono::steady_clock;
 
 constexpr std::chrono::seconds kReadingTime{5};
@@ -30,7 +30,7 @@ Failure cannotUse(const PostgresPlace& place, std::string_view why) {
 Delivery readDelivery(const PostgresRows& rows, std::size_t row, int column) {
     Delivery delivery;
     if (rows.isNull(row, column)) {
-        delivery.inlineTicket = foundation::toData(rows.bytes(row, column + 2));
+        delivery.inlineTicket = base::toData(rows.bytes(row, column + 2));
     } else {
         delivery.asset = Delivery::Asset{rows.text(row, column),
                                          static_cast<std::uint64_t>(rows.integer(row, column + 1))};
@@ -230,7 +230,7 @@ std::optional<Data> PostgresStore::findAsset(const std::string& identifier) {
         const PostgresRows rows =
             connection.query("SELECT ticket FROM record WHERE asset = $1 LIMIT 1", {identifier}, deadline);
         if (rows.size() == 0) return std::nullopt;
-        return foundation::toData(rows.bytes(0, 0));
+        return base::toData(rows.bytes(0, 0));
     });
 }
 
@@ -342,7 +342,7 @@ void PostgresStore::walkContents(const ContentsVisitor& visitor) {
                               [&](const PostgresRows& rows) { visitor.event(readEvent(rows, 0)); });
         connection.forEachRow(records.c_str(), {}, kSilence, [&](const PostgresRows& rows) {
             visitor.record(parseEnvironment(rows.text(0, 7)).value_or(Environment::production),
-                           {readRecord(rows, 0), foundation::toData(rows.bytes(0, 6))});
+                           {readRecord(rows, 0), base::toData(rows.bytes(0, 6))});
         });
     });
 }

@@ -37,7 +37,7 @@ class PostgresStore final : public RecordStore {
     std::optional<Delivery> findTicket(Environment environment, const std::string& recordName) override;
     std::vector<std::optional<Delivery>> findTickets(Environment environment,
                                                      std::span<const std::string> recordNames) override;
-    std::optional<foundation::Data> findAsset(const std::string& identifier) override;
+    std::optional<base::Data> findAsset(const std::string& identifier) override;
     std::size_t countRecords() override;
     PutOutcome put(Environment environment, const std::vector<SignedRecord>& records,
                    const Occasion& occasion) override;

@@ -74,14 +74,14 @@ std::optional<PutOutcome> findRequest(PostgresConnection& connection, const Occa
 
 /// Stores the occasion's request, if it has one, and removes some expired ones.
 void keepRequest(PostgresConnection& connection, const Occasion& occasion, const Event& event,
-                 foundation::ByteView ticket, Deadline deadline);
+                 base::ByteView ticket, Deadline deadline);
 
 /// The text form of an array parameter, element by element.
 class PostgresArray {
   public:
     void text(std::string_view text);
-    void bytes(foundation::ByteView bytes);
-    void bytes(std::string_view bytes) { this->bytes(foundation::asBytes(bytes)); }
+    void bytes(base::ByteView bytes);
+    void bytes(std::string_view bytes) { this->bytes(base::asBytes(bytes)); }
     void number(std::int64_t number);
     void boolean(bool value);
     void null();

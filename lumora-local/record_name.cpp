@@ -1,7 +1,7 @@
 #include "lumora-local/record_name.h"
 
+#include "base/text.h"
 #include "formats/tm_ticket.h"
-#include "foundation/hex.h"
 
 namespace pinwell::lumora {
 std::optional<std::size_t> hashLength(std::uint32_t algorithm) {
@@ -11,7 +11,7 @@ std::optional<std::size_t> hashLength(std::uint32_t algorithm) {
 }
 
 std::string recordName(const CodeHash& hash) {
-    const std::string hex = foundation::toHex(hash.hash);
+    const std::string hex = base::toHex(hash.hash);
     return hash.algorithm == 0 ? "1/" + hex : "2/" + std::to_string(hash.algorithm) + "/" + hex;
 }
 
@@ -29,7 +29,7 @@ std::optional<CodeHash> parseRecordName(std::string_view name) {
     }
     const std::optional<std::size_t> length = hashLength(parsed.algorithm);
     if (!length || name.size() != 2 * *length) return std::nullopt;
-    std::optional<foundation::Data> hash = foundation::parseHex(name);
+    std::optional<base::Data> hash = base::parseHex(name);
     if (!hash) return std::nullopt;
     parsed.hash = *std::move(hash);
     return parsed;

@@ -10,11 +10,11 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/date.h"
+#include "base/bytes.h"
 #include "lumora-local/event.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/record_name.h"
+#include "values/date.h"
 
 namespace pinwell::lumora {
 
@@ -24,7 +24,7 @@ struct Delivery {
         std::string identifier;  // one path component: lower-case hexadecimal
         std::uint64_t size = 0;
     };
-    std::optional<foundation::Data> inlineTicket;
+    std::optional<base::Data> inlineTicket;
     std::optional<Asset> asset;
 };
 
@@ -47,7 +47,7 @@ class RecordSource {
 
     /// The ticket of an asset identifier. Replacing a record removes its asset, so a revoked record's earlier
     /// ticket is no longer delivered.
-    virtual std::optional<foundation::Data> findAsset(const std::string& identifier) = 0;
+    virtual std::optional<base::Data> findAsset(const std::string& identifier) = 0;
 
     virtual std::size_t countRecords() = 0;
 
@@ -71,12 +71,12 @@ struct Record {
     std::vector<CodeHash> hashes;  // the ticket's, the artefact's own first; then those of earlier tickets
     bool revoked = false;
     bool asAsset = false;
-    foundation::Date signedAt;
+    values::Date signedAt;
 };
 
 struct SignedRecord {
     Record record;
-    foundation::Data ticket;
+    base::Data ticket;
 };
 
 /// Identifies the request of a change, so that the store recognises a repetition. It is stored for
@@ -90,7 +90,7 @@ inline constexpr std::int64_t kRequestLife = 24 * 60 * 60;  // seconds
 
 /// Actor, time and reason of a change. Becomes part of each event.
 struct Occasion {
-    foundation::Date time;
+    values::Date time;
     std::string actor;
     std::optional<Reason> reason;  // of a revocation
     std::string comment;
@@ -100,8 +100,8 @@ struct Occasion {
 
 /// The result of a put.
 struct PutOutcome {
-    Event event;                              // about the first record
-    std::optional<foundation::Data> earlier;  // its ticket, if the same request was carried out before
+    Event event;                        // about the first record
+    std::optional<base::Data> earlier;  // its ticket, if the same request was carried out before
 };
 
 /// A put that would make a revoked record valid.
@@ -170,7 +170,7 @@ using StoreGuard = std::function<void(StoreUse)>;
 
 struct EventQuery {
     std::optional<std::string> record;
-    std::optional<foundation::Date> since;  // events of this second and later
+    std::optional<values::Date> since;  // events of this second and later
 };
 
 /// The compared part of a label in a search: bytes from its beginning.
@@ -191,9 +191,9 @@ struct RecordCursor {
 /// searched bytes, then of names; any other in the order of names.
 struct RecordSearch {
     Environment environment = Environment::production;
-    std::optional<std::string> name;       // its beginning; printable ASCII
-    std::optional<std::string> label;      // its beginning; not empty, at most kSearchedLabelBytes bytes
-    std::optional<foundation::Data> hash;  // in the ticket, of any digest type
+    std::optional<std::string> name;   // its beginning; printable ASCII
+    std::optional<std::string> label;  // its beginning; not empty, at most kSearchedLabelBytes bytes
+    std::optional<base::Data> hash;    // in the ticket, of any digest type
     std::size_t limit = 0;
     std::optional<RecordCursor> after;
 };
@@ -219,7 +219,7 @@ struct EventCursor {
 struct EventSearch {
     std::optional<std::string> record;
     Environment environment = Environment::production;  // of the record; without one, events of all are found
-    std::optional<foundation::Date> since;              // events of this second and later
+    std::optional<values::Date> since;                  // events of this second and later
     std::size_t limit = 0;
     std::optional<EventCursor> after;
 };

@@ -3,16 +3,16 @@
 #include <chrono>
 #include <cstdint>
 
-#include "foundation/format.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Date;
 using std::chrono::days;
 using std::chrono::seconds;
 using std::chrono::sys_days;
 using std::chrono::year_month_day;
+using values::Date;
 
 constexpr std::int64_t kSecondsPerDay = 86'400;
 
@@ -81,10 +81,10 @@ std::string toRfc3339(Date date) {
     const sys_days day = std::chrono::floor<days>(time);
     const year_month_day calendar(day);
     const std::int64_t rest = (time - day).count();
-    return foundation::format("%04d-%02u-%02uT%02d:%02d:%02dZ", static_cast<int>(calendar.year()),
-                              static_cast<unsigned>(calendar.month()), static_cast<unsigned>(calendar.day()),
-                              static_cast<int>(rest / 3600), static_cast<int>(rest / 60 % 60),
-                              static_cast<int>(rest % 60));
+    return values::format("%04d-%02u-%02uT%02d:%02d:%02dZ", static_cast<int>(calendar.year()),
+                          static_cast<unsigned>(calendar.month()), static_cast<unsigned>(calendar.day()),
+                          static_cast<int>(rest / 3600), static_cast<int>(rest / 60 % 60),
+                          static_cast<int>(rest % 60));
 }
 
 std::optional<Date> parseRfc3339(std::string_view text) {

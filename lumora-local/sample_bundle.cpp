@@ -10,20 +10,20 @@
 // The executables are universal images of two slices, each signed ad hoc (ad_hoc_signature.h).
 #include <map>
 
-#include "foundation/byte_writer.h"
-#include "foundation/format.h"
-#include "foundation/value.h"
+#include "base/byte_io.h"
 #include "lumora-local/ad_hoc_signature.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/samples.h"
+#include "values/format.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteView;
-using foundation::ByteWriter;
-using foundation::Data;
-using foundation::Dictionary;
+using base::ByteView;
+using base::ByteWriter;
+using base::Data;
+using values::Dictionary;
 
 constexpr std::string_view kName = "Sample";
 constexpr std::string_view kBundleIdentifier = "example.lumora.sample";
@@ -141,7 +141,7 @@ SignedImage signedImage(std::uint32_t cpuType, const std::string& identifier,
     const AdHocSignature signature = signatureOf(image);
     const Data superblob = signature.superblob();
     Data codeHash = signature.codeHash();
-    foundation::append(image, superblob);
+    base::append(image, superblob);
     return {std::move(image), std::move(codeHash)};
 }
 
@@ -200,7 +200,7 @@ void writeFramework(const std::string& frameworks, ResourceSeal& outer) {
     const Data list = information(name, identifier, "FMWK");
     ResourceSeal seal;
     seal.addFile("Resources/Info.plist", list);
-    seal.addFile("Resources/Greeting.txt", foundation::asBytes(kGreeting));
+    seal.addFile("Resources/Greeting.txt", base::asBytes(kGreeting));
     const SealedComponents components{.informationPropertyList = list, .resourceSeal = seal.document()};
     const Program program = makeProgram(identifier, components);
     outer.addNestedCode("Frameworks/" + name + ".framework", program.codeHashes);
@@ -212,7 +212,7 @@ void writeFramework(const std::string& frameworks, ResourceSeal& outer) {
         makeDirectory(directory, 0755);
     writeNewFile(version + "/" + name, program.image, 0755);
     writeNewFile(version + "/Resources/Info.plist", list, 0644);
-    writeNewFile(version + "/Resources/Greeting.txt", foundation::asBytes(kGreeting), 0644);
+    writeNewFile(version + "/Resources/Greeting.txt", base::asBytes(kGreeting), 0644);
     writeNewFile(version + "/_CodeSignature/CodeResources", components.resourceSeal, 0644);
     makeLink(framework + "/Versions/Current", "A");
     for (const std::string& entry : {name, std::string("Resources")})
@@ -222,11 +222,11 @@ void writeFramework(const std::string& frameworks, ResourceSeal& outer) {
 void writeResources(const std::string& resources, ResourceSeal& seal) {
     makeDirectory(resources, 0755);
     makeDirectory(resources + "/en.lproj", 0755);
-    writeNewFile(resources + "/ReadMe.txt", foundation::asBytes(kApplicationReadMe), 0644);
-    writeNewFile(resources + "/en.lproj/Greeting.txt", foundation::asBytes(kGreeting), 0644);
+    writeNewFile(resources + "/ReadMe.txt", base::asBytes(kApplicationReadMe), 0644);
+    writeNewFile(resources + "/en.lproj/Greeting.txt", base::asBytes(kGreeting), 0644);
     makeLink(resources + "/Latest.txt", "ReadMe.txt");
-    seal.addFile("Resources/ReadMe.txt", foundation::asBytes(kApplicationReadMe));
-    seal.addOptionalFile("Resources/en.lproj/Greeting.txt", foundation::asBytes(kGreeting));
+    seal.addFile("Resources/ReadMe.txt", base::asBytes(kApplicationReadMe));
+    seal.addOptionalFile("Resources/en.lproj/Greeting.txt", base::asBytes(kGreeting));
     seal.addLink("Resources/Latest.txt", "ReadMe.txt");
 }
 

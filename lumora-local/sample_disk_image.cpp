@@ -35,8 +35,8 @@
 #include <cstdint>
 #include <utility>
 
+#include "base/byte_io.h"
 #include "formats/disk_image.h"
-#include "foundation/byte_writer.h"
 #include "lumora-local/ad_hoc_signature.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/samples.h"
@@ -44,11 +44,11 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Array;
-using foundation::ByteView;
-using foundation::ByteWriter;
-using foundation::Data;
-using foundation::Dictionary;
+using base::ByteView;
+using base::ByteWriter;
+using base::Data;
+using values::Array;
+using values::Dictionary;
 
 constexpr std::uint8_t kFixedDisk = 0xF8;  // media descriptor
 constexpr std::uint32_t kSerialNumber = 0x4C554D4F;

@@ -15,8 +15,8 @@
 #include <utility>
 #include <vector>
 
-#include "foundation/base64.h"
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
+#include "base/text.h"
 #include "lumora-local/certificates.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/samples.h"
@@ -25,11 +25,11 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteView;
-using foundation::ByteWriter;
-using foundation::Data;
-using foundation::Date;
-using foundation::format;
+using base::ByteView;
+using base::ByteWriter;
+using base::Data;
+using values::Date;
+using values::format;
 
 constexpr std::size_t kHeaderSize = 28;
 constexpr std::uint32_t kSha1 = 1;  // the checksum algorithm's number in the header
@@ -41,7 +41,7 @@ constexpr std::string_view kPackageInfo =
     "          install-location=\"/\" auth=\"none\"/>\n";
 constexpr std::string_view kReadMe = "A sample package, to try a record service with.\n";
 
-using MessageHandle = foundation::Handle<CMS_ContentInfo, CMS_ContentInfo_free>;
+using MessageHandle = base::Handle<CMS_ContentInfo, CMS_ContentInfo_free>;
 
 // The stack owns its certificates too.
 struct FreeStack {
@@ -56,8 +56,8 @@ struct ArchivedFile {
     bool isCompressed;
 
     Data archived() const {
-        const ByteView bytes = foundation::asBytes(contents);
-        return isCompressed ? deflated(bytes) : foundation::toData(bytes);
+        const ByteView bytes = base::asBytes(contents);
+        return isCompressed ? deflated(bytes) : base::toData(bytes);
     }
 };
 
@@ -100,8 +100,7 @@ class Signer {
         for (const IssuedCertificate* issued : {&leaf_, &root_}) {
             const Data encoded =
                 encodeDer<const X509>(i2d_X509, issued->certificate.get(), "encode a certificate");
-            certificates +=
-                format("<X509Certificate>%@</X509Certificate>", foundation::encodeBase64(encoded));
+            certificates += format("<X509Certificate>%@</X509Certificate>", base::encodeBase64(encoded));
         }
         return format(
             "<KeyInfo xmlns=\"http://www.w3.org/2000/09/xmldsig#\"><X509Data>%@</X509Data></KeyInfo>",
@@ -126,7 +125,7 @@ std::string describe(const ArchivedFile& file, std::size_t number, std::size_t o
         "   </data>\n"
         "  </file>\n",
         number, file.name, archived.size(), offset, file.contents.size(), encoding,
-        foundation::toHex(sha1(archived)), foundation::toHex(sha1(foundation::asBytes(file.contents))));
+        base::toHex(sha1(archived)), base::toHex(sha1(base::asBytes(file.contents))));
 }
 
 std::string tableOfContents(const std::string& keyInfo, std::size_t signatureSize) {
@@ -153,7 +152,7 @@ Data makePackage(Date now) {
     // The table gives the signature's length, and the signature is over the table's digest.
     const std::size_t signatureSize = signer.sign(Data(kChecksumSize)).size();
     const std::string table = tableOfContents(signer.keyInfo(), signatureSize);
-    const Data stream = deflated(foundation::asBytes(table));
+    const Data stream = deflated(base::asBytes(table));
     const Data checksum = sha1(stream);
     const Data signature = signer.sign(checksum);
     if (signature.size() != signatureSize) throw Failure(EX_SOFTWARE, "signatures of different lengths");

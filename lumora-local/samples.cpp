@@ -6,15 +6,15 @@
 #include <system_error>
 #include <utility>
 
-#include "foundation/format.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteView;
+using base::Data;
 
 const Bytef* zlibBytes(ByteView bytes) {
     return reinterpret_cast<const Bytef*>(bytes.data());
@@ -64,15 +64,15 @@ class PendingSet {
 
 }  // namespace
 
-std::vector<std::string> writeSamples(const std::string& directory, foundation::Date now) {
+std::vector<std::string> writeSamples(const std::string& directory, values::Date now) {
     std::error_code error;
     std::filesystem::create_directories(directory, error);
     if (error)
-        throw Failure(EX_CANTCREAT, foundation::format("cannot create %@: %@", directory, error.message()));
+        throw Failure(EX_CANTCREAT, values::format("cannot create %@: %@", directory, error.message()));
     for (const char* const name : {kApplication, kSignedImage, kUnsignedImage, kPackage}) {
         const std::string path = directory + "/" + name;
         if (std::filesystem::symlink_status(path, error).type() != std::filesystem::file_type::not_found)
-            throw Failure(EX_CANTCREAT, foundation::format("%@ exists", path));
+            throw Failure(EX_CANTCREAT, values::format("%@ exists", path));
     }
     PendingSet set;
     set.add(writeSampleApplication(directory));

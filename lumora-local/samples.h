@@ -10,8 +10,8 @@
 #include <utility>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/date.h"
+#include "base/bytes.h"
+#include "values/date.h"
 
 namespace pinwell::lumora {
 
@@ -25,23 +25,23 @@ namespace pinwell::lumora {
 ///
 /// Overwrites nothing. If one of them exists or cannot be written, no new file remains. Throws
 /// Failure.
-std::vector<std::string> writeSamples(const std::string& directory, foundation::Date now);
+std::vector<std::string> writeSamples(const std::string& directory, values::Date now);
 
 inline constexpr std::uint32_t kCpuTypeArm64 = 0x0100000C;
 inline constexpr std::uint32_t kCpuTypeX86_64 = 0x01000007;
 
 /// The property list and the resource seal that a code directory covers.
 struct SealedComponents {
-    foundation::Data informationPropertyList{};  // empty: it covers none
-    foundation::Data resourceSeal{};
+    base::Data informationPropertyList{};  // empty: it covers none
+    base::Data resourceSeal{};
 };
 
 /// One signed slice: a complete thin image for `cpuType`.
-foundation::Data makeSignedImage(std::uint32_t cpuType, const std::string& identifier,
-                                 const SealedComponents& components);
+base::Data makeSignedImage(std::uint32_t cpuType, const std::string& identifier,
+                           const SealedComponents& components);
 
 /// Slices after a universal header (magic CAFEBABE), each at a multiple of 16 KiB.
-foundation::Data makeUniversalImage(const std::vector<std::pair<std::uint32_t, foundation::Data>>& slices);
+base::Data makeUniversalImage(const std::vector<std::pair<std::uint32_t, base::Data>>& slices);
 
 /// Writes `directory`/Sample.app and returns its path. Overwrites nothing. Throws Failure.
 std::string writeSampleApplication(const std::string& directory);
@@ -49,7 +49,7 @@ std::string writeSampleApplication(const std::string& directory);
 enum class ImageSignature { none, adHoc };
 
 /// A whole disk image, always the same.
-foundation::Data makeDiskImage(ImageSignature signature);
+base::Data makeDiskImage(ImageSignature signature);
 
 /// Writes `directory`/`name` and returns its path. Overwrites nothing. Throws Failure.
 std::string writeSampleDiskImage(const std::string& directory, const std::string& name,
@@ -59,18 +59,18 @@ inline constexpr std::size_t kSectorSize = 512;
 inline constexpr std::size_t kVolumeSectors = 256;
 
 /// The volume in a disk image, the same for the same text. The text has one sector at most.
-foundation::Data makeSampleVolume(std::string_view text);
+base::Data makeSampleVolume(std::string_view text);
 
 /// A whole package, signed at `now`. Throws Failure when the cryptographic library fails.
-foundation::Data makePackage(foundation::Date now);
+base::Data makePackage(values::Date now);
 
 /// Writes `directory`/`name` and returns its path. Overwrites nothing. Throws Failure.
-std::string writeSamplePackage(const std::string& directory, const std::string& name, foundation::Date now);
+std::string writeSamplePackage(const std::string& directory, const std::string& name, values::Date now);
 
 /// A zlib stream (RFC 1950). Throws Failure when the library fails.
-foundation::Data deflated(foundation::ByteView contents);
+base::Data deflated(base::ByteView contents);
 
 /// CRC-32 (ISO 3309).
-std::uint32_t crc32(foundation::ByteView bytes);
+std::uint32_t crc32(base::ByteView bytes);
 
 }  // namespace pinwell::lumora

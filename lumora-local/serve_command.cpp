@@ -22,7 +22,6 @@
 #include <optional>
 #include <string_view>
 
-#include "foundation/format.h"
 #include "lumora-local/admin_listener.h"
 #include "lumora-local/certificates.h"
 #include "lumora-local/failure.h"
@@ -33,11 +32,12 @@
 #include "lumora-local/server.h"
 #include "lumora-local/service_store.h"
 #include "sandbox/sandbox.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::format;
+using values::format;
 
 constexpr std::size_t kAdminConnections = 512;
 
@@ -52,8 +52,7 @@ Endpoint reachable(const ServiceDirectory& directory, const Endpoint& bound) {
 ServeOutput inForm(LogForm form, const ServeOutput& output) {
     if (form == LogForm::text) return {output.out, output.err, output.out};
     const auto as = [out = output.out](const char* level) {
-        return
-            [out, level](std::string_view line) { out(messageAsJson(foundation::Date::now(), level, line)); };
+        return [out, level](std::string_view line) { out(messageAsJson(values::Date::now(), level, line)); };
     };
     return {as("info"), as("error"), output.out};
 }
@@ -79,7 +78,7 @@ std::optional<Number> numberIn(const char* text) {
     return number;
 }
 
-foundation::FileDescriptor connectTo(std::string_view name) {
+base::FileDescriptor connectTo(std::string_view name) {
     sockaddr_un address{};
     address.sun_family = AF_UNIX;
     const bool usable = name.size() > 1 && name.size() < sizeof address.sun_path;
@@ -87,7 +86,7 @@ foundation::FileDescriptor connectTo(std::string_view name) {
     std::memcpy(address.sun_path, name.data(), name.size());
     if (name[0] == '@') address.sun_path[0] = '\0';  // an abstract name, which has no end mark
     const auto length = static_cast<socklen_t>(offsetof(sockaddr_un, sun_path) + name.size());
-    foundation::FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+    base::FileDescriptor socket(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
     // The socket interface's own cast: every address family shares this header.
     const auto* generic = reinterpret_cast<const sockaddr*>(&address);
     if (!socket || ::connect(socket.get(), generic, length) != 0) return {};
@@ -114,7 +113,7 @@ class ServiceManager {
     std::optional<std::chrono::microseconds> signOfLife() const noexcept { return signOfLife_; }
 
   private:
-    foundation::FileDescriptor socket_;
+    base::FileDescriptor socket_;
     std::optional<std::chrono::microseconds> signOfLife_;
 };
 
@@ -133,9 +132,9 @@ void ServiceManager::tell(std::string_view state) const noexcept {
 }
 
 /// Becomes readable every `interval`; each time is read as eight bytes. Throws Failure.
-foundation::FileDescriptor makeTicker(std::chrono::microseconds interval) {
+base::FileDescriptor makeTicker(std::chrono::microseconds interval) {
     constexpr std::int64_t kMillion = 1'000'000;
-    foundation::FileDescriptor timer(::timerfd_create(CLOCK_MONOTONIC, TFD_CLOEXEC | TFD_NONBLOCK));
+    base::FileDescriptor timer(::timerfd_create(CLOCK_MONOTONIC, TFD_CLOEXEC | TFD_NONBLOCK));
     const timespec step{interval.count() / kMillion, interval.count() % kMillion * 1000};
     const itimerspec times{step, step};
     if (!timer || ::timerfd_settime(timer.get(), 0, &times, nullptr) != 0) {
@@ -166,7 +165,7 @@ class ManagedRun {
 
   private:
     const ServiceManager& manager_;
-    foundation::FileDescriptor ticker_;
+    base::FileDescriptor ticker_;
 };
 
 void announce(const ServiceDirectory& directory, const ServeOptions& options, const ServeOutput& output,
@@ -185,7 +184,7 @@ void announce(const ServiceDirectory& directory, const ServeOptions& options, co
             format("%@/platform.json sends clients to %@; with --update-platform it names this service",
                    directory.platformPath(), toString(advertised)));
     }
-    if (options.readyFile) replaceFile(*options.readyFile, foundation::asBytes(url + "\n"), 0644);
+    if (options.readyFile) replaceFile(*options.readyFile, base::asBytes(url + "\n"), 0644);
 }
 
 std::optional<AdminOptions> adminOf(const ServiceDirectory& directory) {
@@ -204,12 +203,12 @@ void announce(const ServiceDirectory& directory, const AdminListener& admin, con
     output.out(format("administration at https://%@", toString(endpoint)));
 }
 
-foundation::FileDescriptor waitForSignals(std::initializer_list<int> numbers) {
+base::FileDescriptor waitForSignals(std::initializer_list<int> numbers) {
     sigset_t signals;
     sigemptyset(&signals);
     for (const int number : numbers) sigaddset(&signals, number);
     if (::pthread_sigmask(SIG_BLOCK, &signals, nullptr) != 0) throw Failure(EX_OSERR, "cannot block signals");
-    foundation::FileDescriptor descriptor(::signalfd(-1, &signals, SFD_CLOEXEC | SFD_NONBLOCK));
+    base::FileDescriptor descriptor(::signalfd(-1, &signals, SFD_CLOEXEC | SFD_NONBLOCK));
     if (!descriptor) throw Failure(EX_OSERR, "cannot wait for signals");
     return descriptor;
 }
@@ -231,7 +230,7 @@ std::vector<CertificateDate> certificateDates(const ServiceDirectory& directory)
     std::vector<CertificateDate> dates;
     const auto add = [&](const char* role, const std::string& path) {
         try {
-            dates.push_back({role, foundation::Date{expiryOf(readCertificateFile(path).get())}});
+            dates.push_back({role, values::Date{expiryOf(readCertificateFile(path).get())}});
         } catch (const Failure&) {
             // A service for lookups has no signer; another file may have become unreadable.
         }
@@ -279,7 +278,7 @@ class MetricsSource {
 
   private:
     const std::string version_;
-    const foundation::Date started_ = foundation::Date::now();
+    const values::Date started_ = values::Date::now();
     RecordStore& store_;
     ServiceCounts counts_;
     std::mutex mutex_;

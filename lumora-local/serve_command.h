@@ -6,7 +6,7 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/file_io.h"
+#include "base/handle.h"
 #include "lumora-local/endpoint.h"
 #include "lumora-local/service_directory.h"
 
@@ -37,8 +37,8 @@ struct ServeOutput {
 
 /// Descriptors that become readable when signals arrive.
 struct ServeSignals {
-    foundation::FileDescriptor stop;    // SIGTERM, SIGINT
-    foundation::FileDescriptor reload;  // SIGHUP
+    base::FileDescriptor stop;    // SIGTERM, SIGINT
+    base::FileDescriptor reload;  // SIGHUP
 };
 
 /// Blocks the signals for the calling thread and the threads that it starts from now on. Call it before any

@@ -12,8 +12,8 @@
 #include <memory>
 #include <thread>
 
-#include "foundation/format.h"
 #include "lumora-local/connection.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -160,7 +160,7 @@ void work(asio::io_context& context, const Server::LogLine& errorLog) {
             context.run();
             return;
         } catch (const std::exception& error) {
-            errorLog(foundation::format("a connection ended: %s", error.what()));
+            errorLog(values::format("a connection ended: %s", error.what()));
         }
     }
 }

@@ -7,27 +7,27 @@
 #include <optional>
 #include <system_error>
 
-#include "foundation/bytes.h"
-#include "foundation/file_io.h"
-#include "foundation/format.h"
-#include "foundation/json.h"
-#include "foundation/platform_directory.h"
-#include "foundation/value.h"
+#include "base/bytes.h"
+#include "base/file_io.h"
+#include "config/platform_directory.h"
 #include "lumora-local/authority.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/key_file.h"
 #include "lumora-local/sqlite_store.h"
+#include "values/format.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Array;
-using foundation::Data;
-using foundation::Dictionary;
-using foundation::format;
-using foundation::Result;
-using foundation::Value;
+using base::Data;
+using base::Result;
+using values::Array;
+using values::Dictionary;
+using values::format;
+using values::Value;
 
 constexpr mode_t kPublicDirectoryMode = 0755;
 constexpr mode_t kPrivateDirectoryMode = 0700;
@@ -44,20 +44,20 @@ constexpr std::string_view kLumoraKey = "lumora";
 constexpr std::string_view kHostKey = "host";
 
 Data jsonDocument(const Value& value) {
-    Result<Data> document = foundation::serializeJSON(value);
+    Result<Data> document = values::serializeJSON(value);
     if (!document) throw Failure(EX_SOFTWARE, document.error().localizedDescription());
     document->push_back(std::byte{'\n'});
     return *std::move(document);
 }
 
 Value parseJson(const Data& bytes, const std::string& path) {
-    Result<Value> value = foundation::parseJSON(bytes, foundation::EqualKeys::refused);
+    Result<Value> value = values::parseJSON(bytes, values::EqualKeys::refused);
     if (!value) throw Failure(EX_CONFIG, format("%@: %@", path, value.error().localizedDescription()));
     return *std::move(value);
 }
 
 Value readJson(const std::string& path) {
-    const Result<Data> bytes = foundation::readSmallFile(path, kMaximumDescriptionSize);
+    const Result<Data> bytes = base::readSmallFile(path, kMaximumDescriptionSize);
     if (!bytes) throw Failure(EX_CONFIG, bytes.error().localizedDescription());
     return parseJson(*bytes, path);
 }
@@ -67,18 +67,18 @@ Value platformDescription(const Endpoint& endpoint) {
 }
 
 void writeCertificate(const std::string& directory, const std::string& name, const Identity& identity) {
-    writeNewFile(directory + "/" + name + ".pem", foundation::asBytes(identity.certificate), kPublicFileMode);
+    writeNewFile(directory + "/" + name + ".pem", base::asBytes(identity.certificate), kPublicFileMode);
 }
 
 void writeIdentity(const std::string& directory, const std::string& name, const Identity& identity) {
     writeCertificate(directory, name, identity);
-    writeNewFile(directory + "/" + name + ".key", foundation::asBytes(identity.privateKey), kPrivateFileMode);
+    writeNewFile(directory + "/" + name + ".key", base::asBytes(identity.privateKey), kPrivateFileMode);
 }
 
 void buildPlatform(const std::string& directory, const Authority& authority, const Endpoint& endpoint) {
     makeDirectory(directory, kPublicDirectoryMode);
     makeDirectory(directory + "/roots", kPublicDirectoryMode);
-    writeNewFile(directory + "/roots/lumora-local.pem", foundation::asBytes(authority.root.certificate),
+    writeNewFile(directory + "/roots/lumora-local.pem", base::asBytes(authority.root.certificate),
                  kPublicFileMode);
     writeNewFile(directory + "/platform.json", jsonDocument(platformDescription(endpoint)), kPublicFileMode);
     flushDirectory(directory + "/roots");
@@ -134,9 +134,9 @@ class Surroundings {
     void publish(const std::string& directory, std::string_view passphrase) {
         if (!service_.signerRequest.empty()) {
             const Identity signer = requestSigner(passphrase);
-            writeNewFile(directory + "/service/" + kFirstSignerKey, foundation::asBytes(signer.privateKey),
+            writeNewFile(directory + "/service/" + kFirstSignerKey, base::asBytes(signer.privateKey),
                          kPrivateFileMode);
-            writeNewFile(service_.signerRequest, foundation::asBytes(signer.certificate), kPublicFileMode);
+            writeNewFile(service_.signerRequest, base::asBytes(signer.certificate), kPublicFileMode);
             requestWritten_ = true;
         }
         if (root_) root_->publish();
@@ -164,7 +164,7 @@ class Surroundings {
 }  // namespace
 
 ServiceDirectory ServiceDirectory::create(const std::string& path, const NewService& service,
-                                          foundation::Date now) {
+                                          values::Date now) {
     std::vector<std::string> hosts = service.hosts;
     if (hosts.empty()) hosts = {"localhost", "127.0.0.1", "::1"};
     Passphrase passphrase;
@@ -184,7 +184,7 @@ ServiceDirectory ServiceDirectory::create(const std::string& path, const NewServ
 
 ServiceDirectory ServiceDirectory::open(const std::string& path) {
     const std::string description = path + "/service/service.json";
-    const Result<Data> bytes = foundation::readSmallFile(description, kMaximumDescriptionSize);
+    const Result<Data> bytes = base::readSmallFile(description, kMaximumDescriptionSize);
     if (!bytes) {
         throw Failure(EX_NOINPUT, format("%@ has no readable record service: %@", path,
                                          bytes.error().localizedDescription()));
@@ -204,7 +204,7 @@ TicketSigner ServiceDirectory::openSigner() const {
 
 void ServiceDirectory::changeSettings(const std::function<void(Dictionary&)>& change) const {
     const std::string folder = path_ + "/service";
-    const foundation::FileDescriptor lock(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    const base::FileDescriptor lock(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     if (!lock || ::flock(lock.get(), LOCK_EX) != 0) {
         throw Failure(EX_NOPERM, format("cannot lock %@", folder));
     }
@@ -225,7 +225,7 @@ std::string ServiceDirectory::moveStore(const std::string& url) const {
 }
 
 Endpoint ServiceDirectory::advertisedEndpoint() const {
-    const Result<std::string> host = foundation::PlatformDirectory(platformPath()).lumoraHost();
+    const Result<std::string> host = config::PlatformDirectory(platformPath()).lumoraHost();
     if (!host) throw Failure(EX_CONFIG, host.error().localizedDescription());
     const std::optional<Endpoint> endpoint = parseEndpoint(*host, kHttpsPort);
     if (!endpoint) throw Failure(EX_CONFIG, format("%@ is not a HOST:PORT to listen on", *host));

@@ -17,11 +17,11 @@
 #include <string>
 #include <vector>
 
-#include "foundation/date.h"
-#include "foundation/value_fwd.h"
 #include "lumora-local/endpoint.h"
 #include "lumora-local/service_settings.h"
 #include "lumora-local/ticket_maker.h"
+#include "values/date.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 
@@ -39,7 +39,7 @@ class ServiceDirectory {
   public:
     /// Makes everything that the table above lists, with fresh keys and an empty store, or nothing at all.
     /// `path` may be an empty directory; any other existing file stays unchanged (EX_CANTCREAT).
-    static ServiceDirectory create(const std::string& path, const NewService& service, foundation::Date now);
+    static ServiceDirectory create(const std::string& path, const NewService& service, values::Date now);
 
     /// Reads the description. Throws Failure (EX_NOINPUT) when there is no service at `path`, (EX_CONFIG)
     /// when its description is damaged.
@@ -70,7 +70,7 @@ class ServiceDirectory {
 
     /// Rewrites service.json in one step, as `change` edits it; one process at a time. The new document is
     /// checked before it replaces the old one. Throws Failure.
-    void changeSettings(const std::function<void(foundation::Dictionary&)>& change) const;
+    void changeSettings(const std::function<void(values::Dictionary&)>& change) const;
 
     /// URL of the database with the records; `nullopt` if they are in the file at storePath().
     const std::optional<std::string>& storeUrl() const noexcept { return settings_.storeUrl; }

@@ -5,18 +5,18 @@
 #include <initializer_list>
 #include <string_view>
 
-#include "foundation/format.h"
 #include "lumora-local/endpoint.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/key_file.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Array;
-using foundation::Dictionary;
-using foundation::format;
-using foundation::Value;
+using values::Array;
+using values::Dictionary;
+using values::format;
+using values::Value;
 
 constexpr std::size_t kCertificatesInChain = 3;
 

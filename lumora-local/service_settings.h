@@ -21,9 +21,9 @@
 #include <string>
 #include <vector>
 
-#include "foundation/value.h"
 #include "lumora-local/access_log.h"
 #include "lumora-local/endpoint.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 
@@ -71,6 +71,6 @@ struct ServiceSettings {
 
 /// Reads the document of the file at `path`; the paths in the result are absolute, or relative as `path` is.
 /// Throws Failure (EX_CONFIG), which names the file and the key.
-ServiceSettings parseServiceSettings(const foundation::Value& document, const std::string& path);
+ServiceSettings parseServiceSettings(const values::Value& document, const std::string& path);
 
 }  // namespace pinwell::lumora

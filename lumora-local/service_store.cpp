@@ -5,13 +5,13 @@
 #include <functional>
 #include <mutex>
 
-#include "foundation/format.h"
 #include "lumora-local/event.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/postgres_pool.h"
 #include "lumora-local/postgres_store.h"
 #include "lumora-local/sha256.h"
 #include "lumora-local/sqlite_store.h"
+#include "values/format.h"
 
 #if PINWELL_LUMORA_POSTGRESQL
 #endif
@@ -22,9 +22,9 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::asBytes;
-using foundation::Data;
-using foundation::format;
+using base::asBytes;
+using base::Data;
+using values::format;
 
 /// Whether service.json still names the opened store. The file is read again only after a change.
 class StoreWatch {
@@ -154,7 +154,7 @@ namespace {
 class RunningDigest {
   public:
     void add(const std::string& item) {
-        const std::string text = foundation::toString(digest_) + item;
+        const std::string text = base::toString(digest_) + item;
         digest_ = sha256(asBytes(text));
     }
     const Data& value() const noexcept { return digest_; }
@@ -179,10 +179,10 @@ std::string fieldsOf(Environment environment, const SignedRecord& entry) {
     appendField(text, std::to_string(record.signedAt.seconds));
     for (const CodeHash& hash : record.hashes) {
         appendField(text, std::to_string(hash.algorithm));
-        appendField(text, foundation::toString(hash.hash));
+        appendField(text, base::toString(hash.hash));
     }
     text += 't';
-    appendField(text, foundation::toString(sha256(entry.ticket)));
+    appendField(text, base::toString(sha256(entry.ticket)));
     return text;
 }
 

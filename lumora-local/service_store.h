@@ -33,7 +33,7 @@ struct Migration {
 struct ContentsSummary {
     std::size_t records = 0;
     std::size_t events = 0;
-    foundation::Data digest;  // SHA-256, over every field of every record and every event's hash
+    base::Data digest;  // SHA-256, over every field of every record and every event's hash
     bool operator==(const ContentsSummary&) const = default;
 };
 ContentsSummary summarize(RecordStore& store);

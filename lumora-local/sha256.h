@@ -6,12 +6,12 @@
 namespace pinwell::lumora {
 
 /// 32 bytes. Throws std::bad_alloc if the cryptographic library fails.
-inline foundation::Data sha256(foundation::ByteView bytes) {
+inline base::Data sha256(base::ByteView bytes) {
     return crypto::digestOf(crypto::Digest::sha256, bytes);
 }
 
 /// 20 bytes. Throws as sha256().
-inline foundation::Data sha1(foundation::ByteView bytes) {
+inline base::Data sha1(base::ByteView bytes) {
     return crypto::digestOf(crypto::Digest::sha1, bytes);
 }
 

@@ -16,20 +16,20 @@
 #include <mutex>
 #include <system_error>
 
-#include "foundation/file_io.h"
-#include "foundation/format.h"
+#include "base/handle.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/key_file.h"
 #include "lumora-local/openssl_handles.h"
 #include "lumora-local/service_settings.h"
 #include "lumora-local/sha256.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteView;
-using foundation::Data;
-using foundation::FileDescriptor;
+using base::ByteView;
+using base::Data;
+using base::FileDescriptor;
 using OpenKey = std::function<std::unique_ptr<DigestSigner>()>;
 
 // A request is the digest to sign. A response is one byte with an exit status, two bytes with the length of
@@ -71,7 +71,7 @@ bool sendAnswer(int descriptor, int status, ByteView bytes) {
     bytes = bytes.first(std::min(bytes.size(), kMaximumAnswer));
     Data answer{static_cast<std::byte>(status), static_cast<std::byte>(bytes.size() & 0xFFU),
                 static_cast<std::byte>(bytes.size() >> 8U)};
-    foundation::append(answer, bytes);
+    base::append(answer, bytes);
     return writeFully(descriptor, answer);
 }
 
@@ -80,9 +80,9 @@ bool answerWith(int descriptor, Work&& work) {
     try {
         return sendAnswer(descriptor, EX_OK, work());
     } catch (const Failure& failure) {
-        return sendAnswer(descriptor, failure.exitStatus(), foundation::asBytes(failure.what()));
+        return sendAnswer(descriptor, failure.exitStatus(), base::asBytes(failure.what()));
     } catch (const std::exception& error) {
-        return sendAnswer(descriptor, EX_SOFTWARE, foundation::asBytes(error.what()));
+        return sendAnswer(descriptor, EX_SOFTWARE, base::asBytes(error.what()));
     }
 }
 
@@ -139,8 +139,8 @@ class KeyBehindProcess final : public SigningKey {
 
   private:
     [[noreturn]] static void failStarting() {
-        throw Failure(EX_OSERR, foundation::format("cannot start the process that signs: %@",
-                                                   std::generic_category().message(errno)));
+        throw Failure(EX_OSERR, values::format("cannot start the process that signs: %@",
+                                               std::generic_category().message(errno)));
     }
     [[noreturn]] static void failTalking() {
         throw Failure(EX_IOERR, "the process that speaks to the token has ended, or does not answer");
@@ -161,7 +161,7 @@ class KeyBehindProcess final : public SigningKey {
         Data bytes(size);
         if (!readFully(ours_.get(), bytes.data(), size)) giveUp();
         const int status = std::to_integer<int>(head[0]);
-        if (status != EX_OK) throw Failure(status, foundation::toString(bytes));
+        if (status != EX_OK) throw Failure(status, base::toString(bytes));
         return bytes;
     }
 
@@ -235,7 +235,7 @@ std::unique_ptr<SigningKey> openSigningKey(const std::string& key, const std::st
     KeyHandle read = readKeyFile(key, passphraseFile);
     if (!isOnP256(read.get())) {
         throw Failure(EX_CONFIG,
-                      foundation::format("the key in %@ is no EC key on P-256, as tickets need it", key));
+                      values::format("the key in %@ is no EC key on P-256, as tickets need it", key));
     }
     return std::make_unique<KeyFromFile>(std::move(read));
 }

@@ -16,7 +16,7 @@
 #include <memory>
 #include <string>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::lumora {
 
@@ -26,10 +26,10 @@ class SigningKey {
     virtual ~SigningKey() = default;
 
     /// DER of SubjectPublicKeyInfo (RFC 5280, 4.1).
-    virtual foundation::Data publicKey() const = 0;
+    virtual base::Data publicKey() const = 0;
 
     /// ECDSA with SHA-256 over `message`, in DER. Throws Failure.
-    virtual foundation::Data sign(foundation::ByteView message) const = 0;
+    virtual base::Data sign(base::ByteView message) const = 0;
 };
 
 /// `key` is a PEM file, opened with the passphrase at `passphraseFile` if it is encrypted, or a pkcs11: URI.
@@ -43,10 +43,10 @@ class DigestSigner {
     virtual ~DigestSigner() = default;
 
     /// DER of SubjectPublicKeyInfo.
-    virtual foundation::Data publicKey() const = 0;
+    virtual base::Data publicKey() const = 0;
 
     /// ECDSA over a digest of 32 bytes, in DER. Throws Failure (EX_IOERR).
-    virtual foundation::Data signDigest(foundation::ByteView digest) const = 0;
+    virtual base::Data signDigest(base::ByteView digest) const = 0;
 };
 
 /// The time limit of a signature. Opening a token may take its owner longer.

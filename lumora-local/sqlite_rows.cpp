@@ -3,19 +3,18 @@
 
 #include <limits>
 
-#include "foundation/date.h"
-#include "foundation/format.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/sqlite_tables.h"
 #include "lumora-local/store_rules.h"
+#include "values/date.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 
-foundation::Data bytesOf(const SQLite::Column& column) {
+base::Data bytesOf(const SQLite::Column& column) {
     const auto* bytes = static_cast<const std::byte*>(column.getBlob());
-    const foundation::ByteView view(bytes,
-                                    bytes == nullptr ? 0 : static_cast<std::size_t>(column.getBytes()));
-    return foundation::toData(view);
+    const base::ByteView view(bytes, bytes == nullptr ? 0 : static_cast<std::size_t>(column.getBytes()));
+    return base::toData(view);
 }
 
 int exitStatusOfSqlite(int code) noexcept {
@@ -44,7 +43,7 @@ int exitStatusOfSqlite(int code) noexcept {
 Event readEvent(const SQLite::Statement& row) {
     const auto text = [&](int column) { return row.getColumn(column).getString(); };
     Event event;
-    event.time = foundation::Date{row.getColumn(0).getInt64()};
+    event.time = values::Date{row.getColumn(0).getInt64()};
     event.actor = text(1);
     event.action = knownName(parseAction(text(2)), "action", text(2));
     event.environment = knownName(parseEnvironment(text(3)), "environment", text(3));
@@ -91,7 +90,7 @@ std::optional<PutOutcome> findRequest(SQLite::Database& database, const Occasion
 }
 
 void keepRequest(SQLite::Database& database, const Occasion& occasion, const Event& event,
-                 foundation::ByteView ticket) {
+                 base::ByteView ticket) {
     if (!occasion.request) return;
     SQLite::Statement expired(database,
                               "DELETE FROM request WHERE rowid IN (SELECT rowid FROM request WHERE made <= ?"
@@ -147,9 +146,9 @@ std::vector<CodeHash> firstHashes(SQLite::Statement& hashes, const std::string& 
     std::vector<CodeHash> all;
     while (hashes.executeStep()) {
         const SQLite::Column column = hashes.getColumn(1);
-        const foundation::ByteView bytes(static_cast<const std::byte*>(column.getBlob()),
-                                         static_cast<std::size_t>(column.getBytes()));
-        all.push_back({hashes.getColumn(0).getUInt(), foundation::toData(bytes)});
+        const base::ByteView bytes(static_cast<const std::byte*>(column.getBlob()),
+                                   static_cast<std::size_t>(column.getBytes()));
+        all.push_back({hashes.getColumn(0).getUInt(), base::toData(bytes)});
     }
     return all;
 }
@@ -171,7 +170,7 @@ RecordPage searchRecords(SQLite::Database& database, const RecordSearch& search)
     const SearchRange range = rangeOf(search);
     row.bind(3, range.firstName);
     if (search.hash) {
-        bindBytes(row, 4, foundation::toString(*search.hash));
+        bindBytes(row, 4, base::toString(*search.hash));
     } else if (search.label) {
         bindBytes(row, 4, range.firstLabel);
         bindBytes(row, 5, range.endLabel);
@@ -189,7 +188,7 @@ RecordPage searchRecords(SQLite::Database& database, const RecordSearch& search)
         record.name = row.getColumn(0).getString();
         record.label = row.getColumn(1).getString();
         record.revoked = row.getColumn(2).getInt() != 0;
-        record.signedAt = foundation::Date{row.getColumn(3).getInt64()};
+        record.signedAt = values::Date{row.getColumn(3).getInt64()};
         record.asAsset = row.getColumn(4).getInt() != 0;
         record.hashes = firstHashes(hashes, record.name);
         found.push_back(cutHashes(std::move(record)));

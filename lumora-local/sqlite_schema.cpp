@@ -3,18 +3,19 @@
 #include <filesystem>
 #include <system_error>
 
-#include "foundation/bytes.h"
-#include "foundation/date.h"
-#include "foundation/format.h"
+#include "base/bytes.h"
+#include "base/text.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/sha256.h"
 #include "lumora-local/sqlite_tables.h"
+#include "values/date.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::format;
+using values::format;
 
 constexpr int kCurrentVersion = 3;
 
@@ -132,11 +133,11 @@ void logExistingRecords(SQLite::Database& database) {
         event.label = row.getColumn(2).getString();
         event.action = row.getColumn(3).getInt() != 0 ? Action::revoked : Action::issued;
         if (event.action == Action::revoked) event.reason = Reason::unspecified;
-        event.time = foundation::Date{row.getColumn(4).getInt64()};
+        event.time = values::Date{row.getColumn(4).getInt64()};
         event.actor = "lumora-local";
         event.comment = "brought forward from a store without events";
         const SQLite::Column ticket = row.getColumn(5);
-        event.ticket = foundation::toHex(sha256(
+        event.ticket = base::toHex(sha256(
             {static_cast<const std::byte*>(ticket.getBlob()), static_cast<std::size_t>(ticket.getBytes())}));
         event.previous = previous;
         event.hash = hashOf(event);

@@ -6,21 +6,22 @@
 #include <limits>
 #include <utility>
 
-#include "foundation/date.h"
-#include "foundation/format.h"
+#include "base/text.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/sha256.h"
 #include "lumora-local/sqlite_tables.h"
 #include "lumora-local/store_rules.h"
+#include "values/date.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteView;
-using foundation::Data;
-using foundation::Date;
-using foundation::format;
+using base::ByteView;
+using base::Data;
+using values::Date;
+using values::format;
 
 /// Runs database work, and turns the library's exceptions into Failure.
 template <class Work>
@@ -113,7 +114,7 @@ void insertRecord(SQLite::Database& database, Environment environment, const Sig
     statement.bind(3, record.label);
     statement.bind(4, record.revoked ? 1 : 0);
     statement.bind(5, record.signedAt.seconds);
-    if (record.asAsset) statement.bind(6, foundation::toHex(sha256(entry.ticket)));
+    if (record.asAsset) statement.bind(6, base::toHex(sha256(entry.ticket)));
     bindBlob(statement, 7, entry.ticket);
     statement.exec();
 }
@@ -355,7 +356,7 @@ void SqliteStore::walkHistory(const HistoryVisitor& visitor) {
             state.environment =
                 parseEnvironment(records.getColumn(0).getString()).value_or(Environment::production);
             state.name = records.getColumn(1).getString();
-            state.ticket = foundation::toHex(sha256(bytesOf(records.getColumn(2))));
+            state.ticket = base::toHex(sha256(bytesOf(records.getColumn(2))));
             state.revoked = records.getColumn(3).getInt() != 0;
             if (!records.getColumn(4).isNull()) {
                 state.lastTicket = records.getColumn(4).getString();

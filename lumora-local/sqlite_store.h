@@ -7,7 +7,7 @@
 #include <memory>
 #include <mutex>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "lumora-local/record_store.h"
 
 namespace SQLite {
@@ -28,7 +28,7 @@ class SqliteStore final : public RecordStore {
     ~SqliteStore() override;
 
     std::optional<Delivery> findTicket(Environment environment, const std::string& recordName) override;
-    std::optional<foundation::Data> findAsset(const std::string& identifier) override;
+    std::optional<base::Data> findAsset(const std::string& identifier) override;
     std::size_t countRecords() override;
 
     /// From `PRAGMA data_version` for other connections, and a count of this one's own changes.

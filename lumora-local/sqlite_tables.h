@@ -38,7 +38,7 @@ int exitStatusOfSqlite(int code) noexcept;
 Event readEvent(const SQLite::Statement& row);
 
 /// Empty for NULL.
-foundation::Data bytesOf(const SQLite::Column& column);
+base::Data bytesOf(const SQLite::Column& column);
 
 inline constexpr const char* kEventColumns =
     "time, actor, action, environment, record, label, reason, comment, ticket, previous, hash";
@@ -51,7 +51,7 @@ std::optional<PutOutcome> findRequest(SQLite::Database& database, const Occasion
 
 /// Stores the occasion's request, if it has one, and removes some expired ones.
 void keepRequest(SQLite::Database& database, const Occasion& occasion, const Event& event,
-                 foundation::ByteView ticket);
+                 base::ByteView ticket);
 
 /// hashBeforeTheFirstEvent() if there is none.
 std::string lastEventHash(SQLite::Database& database);

@@ -3,9 +3,10 @@
 #include <algorithm>
 #include <set>
 
-#include "foundation/format.h"
+#include "base/text.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/sha256.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -13,17 +14,16 @@ namespace {
 constexpr const char* kWayBack = "nothing was issued. To make it valid again: --reinstate --comment TEXT";
 
 [[noreturn]] void refuse(const Record& record) {
-    throw RevokedFailure(
-        foundation::format("record %@ (%@) is revoked; %s", record.name, record.label, kWayBack),
-        record.name);
+    throw RevokedFailure(values::format("record %@ (%@) is revoked; %s", record.name, record.label, kWayBack),
+                         record.name);
 }
 
 [[noreturn]] void refuse(Environment environment, const Record& record, const RevokedElsewhere& other) {
     std::string revoked = other.name;
-    if (other.environment != environment) revoked += foundation::format(" (%s)", toString(other.environment));
+    if (other.environment != environment) revoked += values::format(" (%s)", toString(other.environment));
     const std::string text =
-        foundation::format("record %@ (%@) would make software of the revoked record %@ valid; %s",
-                           record.name, record.label, revoked, kWayBack);
+        values::format("record %@ (%@) would make software of the revoked record %@ valid; %s", record.name,
+                       record.label, revoked, kWayBack);
     throw RevokedFailure(text, std::move(revoked));
 }
 
@@ -46,8 +46,8 @@ void keepEarlierHashes(Record& record, const std::vector<CodeHash>& earlier) {
         if (listed.contains(hash)) continue;
         if (record.hashes.size() >= most) {
             throw TooManyHashesFailure(
-                foundation::format("the tickets of the record %@ would list more than %zu hashes together",
-                                   record.name, kMaximumKeptHashes));
+                values::format("the tickets of the record %@ would list more than %zu hashes together",
+                               record.name, kMaximumKeptHashes));
         }
         record.hashes.push_back(hash);
     }
@@ -64,7 +64,7 @@ Event makeEvent(Environment environment, const SignedRecord& entry, Action actio
     event.label = entry.record.label;
     if (action == Action::revoked) event.reason = occasion.reason.value_or(Reason::unspecified);
     event.comment = occasion.comment;
-    event.ticket = foundation::toHex(sha256(entry.ticket));
+    event.ticket = base::toHex(sha256(entry.ticket));
     event.previous = std::move(previous);
     event.hash = hashOf(event);
     return event;

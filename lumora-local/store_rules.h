@@ -5,9 +5,9 @@
 #include <string>
 #include <vector>
 
-#include "foundation/format.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/record_store.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 
@@ -90,8 +90,7 @@ class EventPageMaker {
 /// The action, environment or reason that a row names. Throws Failure (EX_CONFIG) if it is not one.
 template <class T>
 T knownName(const std::optional<T>& value, const char* column, const std::string& text) {
-    if (!value)
-        throw Failure(EX_CONFIG, foundation::format("record store: no %s is called %@", column, text));
+    if (!value) throw Failure(EX_CONFIG, values::format("record store: no %s is called %@", column, text));
     return *value;
 }
 

@@ -4,17 +4,17 @@
 
 #include <algorithm>
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 #include "lumora-local/certificates.h"
 #include "lumora-local/openssl_handles.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteView;
-using foundation::ByteWriter;
-using foundation::Data;
-using foundation::format;
+using base::ByteView;
+using base::ByteWriter;
+using base::Data;
+using values::format;
 
 constexpr std::uint16_t kContainerVersion = 1;
 constexpr std::uint32_t kRevokedFlag = 1;
@@ -37,7 +37,7 @@ void requireEncodable(const CodeHash& hash, bool withAlgorithm) {
 }
 
 void appendDer(Data& data, X509* certificate) {
-    foundation::append(data, encodeDer<const X509>(i2d_X509, certificate, "encode a certificate"));
+    base::append(data, encodeDer<const X509>(i2d_X509, certificate, "encode a certificate"));
 }
 
 Data derSequence(const Data& contents) {
@@ -47,7 +47,7 @@ Data derSequence(const Data& contents) {
     Data sequence(static_cast<std::size_t>(total - length));
     unsigned char* end = octets(sequence);
     ASN1_put_object(&end, 1, length, V_ASN1_SEQUENCE, V_ASN1_UNIVERSAL);
-    foundation::append(sequence, contents);
+    base::append(sequence, contents);
     return sequence;
 }
 

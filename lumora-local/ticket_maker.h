@@ -27,10 +27,10 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/date.h"
+#include "base/bytes.h"
 #include "lumora-local/record_name.h"
 #include "lumora-local/signing_key.h"
+#include "values/date.h"
 
 namespace pinwell::lumora {
 
@@ -41,12 +41,12 @@ inline constexpr std::size_t kSignatureFieldSize = 72;
 struct TicketContents {
     std::vector<CodeHash> hashes;  // the artefact's own first
     bool revoked = false;
-    foundation::Date signedAt;
+    values::Date signedAt;
 };
 
 /// Only the payload. Throws Failure (EX_DATAERR) for a hash whose length does not fit its digest type, for a
 /// digest type that no ticket can contain, and for more hashes than the maximum allows.
-foundation::Data encodeTicketPayload(const TicketContents& contents);
+base::Data encodeTicketPayload(const TicketContents& contents);
 
 /// Signs with one key. Immutable after construction; for any thread.
 class TicketSigner {
@@ -59,11 +59,11 @@ class TicketSigner {
     TicketSigner(const std::string& keyPath, const std::vector<std::string>& chainPaths);
 
     /// A complete container. Throws Failure as encodeTicketPayload does.
-    foundation::Data makeTicket(const TicketContents& contents) const;
+    base::Data makeTicket(const TicketContents& contents) const;
 
   private:
     std::shared_ptr<const SigningKey> key_;
-    foundation::Data certificateBlock_;
+    base::Data certificateBlock_;
 };
 
 }  // namespace pinwell::lumora

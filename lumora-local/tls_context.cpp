@@ -10,18 +10,18 @@
 #include <boost/asio/ssl/context.hpp>
 #include <ctime>
 
-#include "foundation/format.h"
-#include "foundation/utf8.h"
+#include "base/text.h"
 #include "lumora-local/certificates.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/key_file.h"
 #include "lumora-local/openssl_handles.h"
 #include "trust/der.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::format;
+using values::format;
 
 constexpr std::size_t kMaximumAuthorities = 64;
 constexpr std::size_t kMaximumCertificates = 8;
@@ -32,7 +32,7 @@ constexpr int kSecurityLevel = 2;  // 112 bits, for every system configuration
 constexpr int kFewestRsaBits = 2048;
 constexpr int kMostRsaBits = 8192;
 
-using StoreHandle = foundation::Handle<X509_STORE, X509_STORE_free>;
+using StoreHandle = base::Handle<X509_STORE, X509_STORE_free>;
 
 struct OpenSSLFree {
     void operator()(unsigned char* bytes) const noexcept { OPENSSL_free(bytes); }
@@ -90,10 +90,10 @@ std::optional<std::string> commonNameOf(X509* certificate) {
     return name;
 }
 
-std::optional<foundation::Date> endOf(X509* certificate) {
+std::optional<values::Date> endOf(X509* certificate) {
     std::tm parts{};
     if (ASN1_TIME_to_tm(X509_get0_notAfter(certificate), &parts) != 1) return std::nullopt;
-    return foundation::Date{static_cast<std::int64_t>(::timegm(&parts))};
+    return values::Date{static_cast<std::int64_t>(::timegm(&parts))};
 }
 
 int refuse(X509_STORE_CTX* context, int error) {
@@ -122,8 +122,8 @@ int judge(X509_STORE_CTX* context, void*) {
 bool canNameAClient(std::string_view name) {
     if (name.empty() || name.size() > kMaximumClientName) return false;
     while (!name.empty()) {
-        const std::size_t size = foundation::utf8SequenceLength(name);
-        if (size == 0 || foundation::isControlCharacter(name.substr(0, size))) return false;
+        const std::size_t size = base::utf8SequenceLength(name);
+        if (size == 0 || base::isControlCharacter(name.substr(0, size))) return false;
         name.remove_prefix(size);
     }
     return true;
@@ -133,7 +133,7 @@ std::optional<Client> clientOf(SSL* connection) {
     X509* const shown = SSL_get0_peer_certificate(connection);
     if (shown == nullptr) return std::nullopt;
     std::optional<std::string> name = commonNameOf(shown);
-    const std::optional<foundation::Date> end = endOf(shown);
+    const std::optional<values::Date> end = endOf(shown);
     if (!name || !end) return std::nullopt;
     return Client{*std::move(name), *end};
 }

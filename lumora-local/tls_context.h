@@ -14,7 +14,7 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/date.h"
+#include "values/date.h"
 
 namespace boost::asio::ssl {
 class context;
@@ -66,7 +66,7 @@ bool canNameAClient(std::string_view name);
 
 struct Client {
     std::string name;  // common name
-    foundation::Date validUntil;
+    values::Date validUntil;
 };
 
 /// The client of a connection after its handshake; `nullopt` if the client has sent no certificate.

@@ -18,7 +18,7 @@
 #include <optional>
 #include <utility>
 
-#include "foundation/handle.h"
+#include "base/handle.h"
 
 namespace pinwell::lumora {
 
@@ -140,7 +140,7 @@ class TlsStream {
     }
 
     next_layer_type socket_;
-    foundation::Handle<SSL, SSL_free> ssl_;
+    base::Handle<SSL, SSL_free> ssl_;
 };
 
 }  // namespace pinwell::lumora

@@ -16,15 +16,15 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteView;
-using foundation::Data;
-using foundation::format;
+using base::ByteView;
+using base::Data;
+using values::format;
 
-using UriHandle = foundation::Handle<P11KitUri, p11_kit_uri_free>;
-using SignatureHandle = foundation::Handle<ECDSA_SIG, ECDSA_SIG_free>;
-using ParameterBuilder = foundation::Handle<OSSL_PARAM_BLD, OSSL_PARAM_BLD_free>;
-using Parameters = foundation::Handle<OSSL_PARAM, OSSL_PARAM_free>;
-using KeyContext = foundation::Handle<EVP_PKEY_CTX, EVP_PKEY_CTX_free>;
+using UriHandle = base::Handle<P11KitUri, p11_kit_uri_free>;
+using SignatureHandle = base::Handle<ECDSA_SIG, ECDSA_SIG_free>;
+using ParameterBuilder = base::Handle<OSSL_PARAM_BLD, OSSL_PARAM_BLD_free>;
+using Parameters = base::Handle<OSSL_PARAM, OSSL_PARAM_free>;
+using KeyContext = base::Handle<EVP_PKEY_CTX, EVP_PKEY_CTX_free>;
 
 constexpr std::size_t kCoordinate = 32;              // bytes of a number on P-256
 constexpr std::size_t kPoint = 1 + 2 * kCoordinate;  // an uncompressed point: 4, x, y
@@ -115,7 +115,7 @@ Data attributeOf(const Token& token, CK_SESSION_HANDLE session, CK_OBJECT_HANDLE
         attribute.ulValueLen > room.size()) {
         return {};
     }
-    return foundation::toData(ByteView(room).first(attribute.ulValueLen));
+    return base::toData(ByteView(room).first(attribute.ulValueLen));
 }
 
 /// CKA_EC_POINT is an OCTET STRING with the point; some libraries leave the header out.

@@ -23,8 +23,8 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/date.h"
 #include "lumora-local/service_directory.h"
+#include "values/date.h"
 
 namespace CLI {
 class App;
@@ -43,19 +43,19 @@ struct SignerRotation {
 /// Gives the signer a new key, certified by the service's own intermediate certificate. Throws Failure:
 /// EX_CONFIG if that one's key is not in the service.
 RotationReport rotateSigner(const ServiceDirectory& directory, const SignerRotation& rotation,
-                            foundation::Date now);
+                            values::Date now);
 
 /// Gives the server a new key and certificate for the hosts of service.json. `rootDirectory` has root.key; if
 /// empty, the service has it. Throws Failure.
 RotationReport rotateServer(const ServiceDirectory& directory, const std::string& rootDirectory,
-                            foundation::Date now);
+                            values::Date now);
 
 /// Installs the three certificates of the PEM file `chainFile`, signer first. They are for the last requested
 /// key, or for `key` (a file or a pkcs11: URI) if that is not empty. A new root is added to the platform
 /// directory. Throws Failure (EX_DATAERR) if clients would refuse the chain, or it is for another key. Then
 /// nothing is changed.
 RotationReport certifySignerElsewhere(const ServiceDirectory& directory, const std::string& chainFile,
-                                      const std::string& key, foundation::Date now);
+                                      const std::string& key, values::Date now);
 
 /// The path of the authority's certificate, present or future.
 std::string clientAuthorityPath(const ServiceDirectory& directory);
@@ -64,7 +64,7 @@ std::string clientAuthorityPath(const ServiceDirectory& directory);
 /// for a client of that name. The first call also makes the authority. Throws Failure: EX_USAGE if the name
 /// is not 1 to 64 bytes of UTF-8 without control characters.
 void makeClientCertificate(const ServiceDirectory& directory, const std::string& name,
-                           const std::string& folder, foundation::Date now);
+                           const std::string& folder, values::Date now);
 
 /// The outcome of one check: of keys, certificates, platform directory, access list or store.
 enum class Condition { fine, expiresSoon, wrong };
@@ -76,8 +76,7 @@ struct Finding {
 };
 
 /// Completes all checks, even after a fault; writes nothing. `warning` is in seconds.
-std::vector<Finding> checkService(const ServiceDirectory& directory, foundation::Date now,
-                                  std::int64_t warning);
+std::vector<Finding> checkService(const ServiceDirectory& directory, values::Date now, std::int64_t warning);
 
 /// 0; 1 if something expires soon; EX_CONFIG if something is wrong.
 int exitStatusOf(const std::vector<Finding>& findings);

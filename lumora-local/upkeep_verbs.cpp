@@ -1,17 +1,17 @@
 #include <CLI/CLI.hpp>
 
-#include "foundation/date.h"
-#include "foundation/format.h"
 #include "lumora-local/command_line.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/service_directory.h"
 #include "lumora-local/upkeep.h"
+#include "values/date.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Date;
-using foundation::format;
+using values::Date;
+using values::format;
 
 ServiceDirectory openNamed(UpkeepVerbs& verbs) {
     takeDirectory(verbs.directory, verbs.words);

@@ -5,8 +5,7 @@
 #include <cerrno>
 #include <utility>
 
-#include "foundation/process.h"
-#include "foundation/url.h"
+#include "runtime/process.h"
 #include "src/DownloadDelegate.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
@@ -14,11 +13,12 @@
 #include "src/messages.h"
 #include "src/run.h"
 #include "src/ticket_record.h"
+#include "values/url.h"
 
 namespace pinwell::retrieval {
 namespace {
 
-using foundation::URL;
+using values::URL;
 
 // Thrown where the controller would end the process.
 struct RunEnded {
@@ -63,7 +63,7 @@ class KeptSession : public https::Session {
 
 class KeptSessions : public https::SessionService {
   public:
-    foundation::Result<std::shared_ptr<https::Session>> ephemeralSession(https::SessionDelegate&) override {
+    base::Result<std::shared_ptr<https::Session>> ephemeralSession(https::SessionDelegate&) override {
         last_ = std::make_shared<KeptSession>();
         return std::shared_ptr<https::Session>(last_);
     }
@@ -80,8 +80,8 @@ Platform withSessions(const Platform& platform, https::SessionService& sessions)
 }
 
 // A download without an outcome must not look successful.
-foundation::Error missingAsset() {
-    return {foundation::kURLErrorDomain, static_cast<std::int64_t>(https::URLErrorCode::unknown),
+base::Error missingAsset() {
+    return {base::kURLErrorDomain, static_cast<std::int64_t>(https::URLErrorCode::unknown),
             "The large ticket was not fetched."};
 }
 
@@ -184,7 +184,7 @@ std::optional<Outcome> ArtefactRun::guarded(Outcome ifThrown,
     try {
         return work();
     } catch (const std::exception& failure) {
-        messages_.push_back(foundation::format("%@ could not be worked on: %@", path_, failure.what()));
+        messages_.push_back(values::format("%@ could not be worked on: %@", path_, failure.what()));
         return ifThrown;
     }
 }
@@ -196,7 +196,7 @@ std::optional<Outcome> ArtefactRun::open(const PWHashedFile::BeforeReading& befo
     filesState_.clear();
     kind_ = Kind::none;
     if (!isPath(path_)) {
-        messages_.push_back(foundation::format("%@ is no path: it holds a zero byte.", path_));
+        messages_.push_back(values::format("%@ is no path: it holds a zero byte.", path_));
         return Outcome{kExitNoInput, Cause::notReadable};
     }
     reading_ = std::make_unique<Reading>(platform_);
@@ -210,7 +210,7 @@ std::optional<Outcome> ArtefactRun::open(const PWHashedFile::BeforeReading& befo
     if (const int status = reading.file->appropriateExitCode(); status != kExitOK)
         return Outcome{status, status == kExitCannotCreate ? Cause::notWritable : Cause::notReadable};
     if (operation_ == kOperationStaple && holdsTrailersWithoutTicket(*reading.file)) {
-        messages_.push_back(foundation::format(
+        messages_.push_back(values::format(
             "%@ has trailers and no ticket among them: one would be written over its first bytes. "
             "Nothing was written to it.",
             path_));
@@ -264,13 +264,13 @@ std::optional<Outcome> ArtefactRun::write(const Answer& answer) {
 }
 
 Outcome ArtefactRun::attach(
-    const std::function<foundation::Result<foundation::Data>(const std::string& recordName)>& ticketFor) {
+    const std::function<base::Result<base::Data>(const std::string& recordName)>& ticketFor) {
     const MessageRedirection redirection([this](std::string line) { messages_.push_back(std::move(line)); });
     return *guarded({kExitCannotCreate, Cause::notWritable}, [&] { return attachUnderLock(ticketFor); });
 }
 
 Outcome ArtefactRun::attachUnderLock(
-    const std::function<foundation::Result<foundation::Data>(const std::string& recordName)>& ticketFor) {
+    const std::function<base::Result<base::Data>(const std::string& recordName)>& ticketFor) {
     std::unique_ptr<files::ItemLock> lock;
     if (const auto ended = open([&] { return lockArtefact(platform_, URL::fileURLWithPath(path_), lock); }))
         return *ended;
@@ -279,13 +279,13 @@ Outcome ArtefactRun::attachUnderLock(
     if (!ticket) {
         messages_.push_back(ticket.error().localizedDescription());
         const bool isMissing =
-            ticket.error().domain() == foundation::kPOSIXErrorDomain && ticket.error().code() == ENOENT;
+            ticket.error().domain() == base::kPOSIXErrorDomain && ticket.error().code() == ENOENT;
         return isMissing ? Outcome{kExitDataError, Cause::notIssued}
                          : Outcome{kExitNoInput, Cause::notReadable};
     }
     DownloadDelegate& controller = *reading_->controller;
     controller.setTempFileURL(platform_.files.temporaryDirectory().appendingPathComponent(
-        foundation::globallyUniqueString() + ".ticket"));
+        runtime::globallyUniqueString() + ".ticket"));
     int status = kExitNothingRecorded;
     try {
         controller.writeDownloadedData(*ticket, nullptr);
@@ -320,7 +320,7 @@ std::optional<Outcome> ArtefactRun::finish(const Answer& answer) {
         if (session != lookup && session->download() && answer.asset) {
             session->download()->setResponse(answer.asset->response);
             const URL location = platform_.files.temporaryDirectory().appendingPathComponent(
-                foundation::globallyUniqueString() + ".download");
+                runtime::globallyUniqueString() + ".download");
             static_cast<void>(platform_.files.writeFile(answer.asset->contents, location,
                                                         files::FileManager::Writing::plain));
             struct Removal {

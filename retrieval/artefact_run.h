@@ -17,7 +17,7 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "retrieval/record_service.h"
 #include "retrieval/report.h"
 #include "src/PWHashedFile/PWHashedFile.h"
@@ -55,8 +55,7 @@ class ArtefactRun {
     /// Staples a ticket from a file, instead of begin() and end(): locks, reads, judges, writes and reads
     /// back. `ticketFor` is called with the record's name. Its error ENOENT ends the run as notIssued, every
     /// other error as notReadable.
-    Outcome attach(
-        const std::function<foundation::Result<foundation::Data>(const std::string& recordName)>& ticketFor);
+    Outcome attach(const std::function<base::Result<base::Data>(const std::string& recordName)>& ticketFor);
 
     /// Empty before begin() has found a hash.
     const std::string& recordName() const noexcept { return recordName_; }
@@ -81,7 +80,7 @@ class ArtefactRun {
     std::optional<Outcome> finish(const Answer& answer);
     std::optional<Outcome> guarded(Outcome ifThrown, const std::function<std::optional<Outcome>()>& work);
     Outcome attachUnderLock(
-        const std::function<foundation::Result<foundation::Data>(const std::string& recordName)>& ticketFor);
+        const std::function<base::Result<base::Data>(const std::string& recordName)>& ticketFor);
     bool isAsRead() const;
     std::string stateOfFiles() const;
 

@@ -11,8 +11,8 @@
 namespace pinwell::retrieval {
 namespace {
 
-foundation::Error cancelledError() {
-    return {foundation::kURLErrorDomain, static_cast<std::int64_t>(https::URLErrorCode::cancelled),
+base::Error cancelledError() {
+    return {base::kURLErrorDomain, static_cast<std::int64_t>(https::URLErrorCode::cancelled),
             "The lookup was ended before its answer came."};
 }
 
@@ -34,8 +34,7 @@ Exchange Connection::exchange(https::Request request, std::optional<Clock::time_
         messages_.clear();
         task = session_->dataTask(
             std::move(request), [&ended](const auto& data, const auto& response, const auto& error) {
-                ended.set_value(
-                    {.response = response, .body = data.value_or(foundation::Data{}), .error = error});
+                ended.set_value({.response = response, .body = data.value_or(base::Data{}), .error = error});
             });
         task->resume();
     }

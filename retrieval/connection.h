@@ -7,19 +7,19 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/url.h"
+#include "base/bytes.h"
 #include "https/session.h"
 #include "retrieval/retry_policy.h"
 #include "src/platform.h"
+#include "values/url.h"
 
 namespace pinwell::retrieval {
 
 /// The result of one request.
 struct Exchange {
     std::optional<https::HTTPResponse> response = {};
-    foundation::Data body = {};
-    std::optional<foundation::Error> error = {};
+    base::Data body = {};
+    std::optional<base::Error> error = {};
     bool serverWasRefused = false;
     std::vector<std::string> messages = {};  // from the server's judgement
 };
@@ -39,8 +39,8 @@ class Connection : public https::SessionDelegate {
 
     void didReceiveChallenge(https::Session& session, const https::AuthenticationChallenge& challenge,
                              const https::ChallengeCompletion& completion) override;
-    void didFinishDownloading(https::Session&, https::Task&, const foundation::URL&) override {}
-    void didComplete(https::Session&, https::Task&, const std::optional<foundation::Error>&) override {}
+    void didFinishDownloading(https::Session&, https::Task&, const values::URL&) override {}
+    void didComplete(https::Session&, https::Task&, const std::optional<base::Error>&) override {}
 
   private:
     Platform platform_;

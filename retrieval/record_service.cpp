@@ -9,18 +9,18 @@
 #include <thread>
 #include <utility>
 
-#include "foundation/bytes.h"
-#include "foundation/json.h"
-#include "foundation/process.h"
-#include "foundation/url.h"
-#include "foundation/value.h"
+#include "base/bytes.h"
+#include "base/file_io.h"
 #include "src/ticket_record.h"
+#include "values/json.h"
+#include "values/url.h"
+#include "values/value.h"
 
 namespace pinwell::retrieval {
 
-using foundation::Array;
-using foundation::Dictionary;
-using foundation::Value;
+using values::Array;
+using values::Dictionary;
+using values::Value;
 
 namespace {
 
@@ -55,14 +55,14 @@ https::HTTPResponse withOwnIdentifier(https::HTTPResponse response) {
     static std::atomic<std::uint64_t> last = 0;
     const auto found = response.headers.find(kRequestIdentifierHeader);
     if (found == response.headers.end()) return response;
-    if (foundation::isSafeFileName(found->second))
+    if (base::isSafeFileName(found->second))
         found->second += "-" + std::to_string(++last);
     else
         response.headers.erase(found);
     return response;
 }
 
-Answer answerOf(const Exchange& exchange, foundation::Data body) {
+Answer answerOf(const Exchange& exchange, base::Data body) {
     Answer answer;
     answer.kind = Answer::Kind::answered;
     answer.response = withOwnIdentifier(*exchange.response);
@@ -71,8 +71,8 @@ Answer answerOf(const Exchange& exchange, foundation::Data body) {
     return answer;
 }
 
-foundation::Error busyError(const https::HTTPResponse& response) {
-    return {foundation::kURLErrorDomain, static_cast<std::int64_t>(https::URLErrorCode::badServerResponse),
+base::Error busyError(const https::HTTPResponse& response) {
+    return {base::kURLErrorDomain, static_cast<std::int64_t>(https::URLErrorCode::badServerResponse),
             "The host \"" + response.url.host() + "\" answered with status " +
                 std::to_string(response.status) + " (" +
                 https::localizedStringForStatusCode(response.status) + ")."};
@@ -127,18 +127,18 @@ Grouping groupingOf(const Value& document, const std::vector<std::string>& names
 }
 
 // The request for the record's asset, if it has one instead of a ticket.
-std::optional<https::Request> assetRequest(const foundation::Data& body) {
-    const auto document = foundation::parseJSON(body);
+std::optional<https::Request> assetRequest(const base::Data& body) {
+    const auto document = values::parseJSON(body);
     if (!document) return std::nullopt;
     try {
         const TicketRecord record = ticketRecordOf(*document);
         const std::string* const url = record.ticketText() == nullptr ? record.assetURLTemplate() : nullptr;
         if (url == nullptr) return std::nullopt;
         https::Request request;
-        request.url = foundation::URL::fromString(assetURLText(*url));
+        request.url = values::URL::fromString(assetURLText(*url));
         if (!request.url) return std::nullopt;
         return request;
-    } catch (const foundation::ValueTypeError&) {
+    } catch (const values::ValueTypeError&) {
         return std::nullopt;
     } catch (const std::out_of_range&) {
         return std::nullopt;
@@ -149,11 +149,11 @@ std::optional<https::Request> assetRequest(const foundation::Data& body) {
 
 bool Answer::hasNoTicket() const {
     if (kind != Kind::answered || body.empty()) return false;
-    const auto document = foundation::parseJSON(body);
+    const auto document = values::parseJSON(body);
     try {
-        const TicketRecord record = ticketRecordOf(document ? *document : foundation::Value());
+        const TicketRecord record = ticketRecordOf(document ? *document : values::Value());
         return record.ticketText() == nullptr && record.assetURLTemplate() == nullptr;
-    } catch (const foundation::ValueTypeError&) {
+    } catch (const values::ValueTypeError&) {
         return false;
     } catch (const std::out_of_range&) {
         return false;
@@ -180,7 +180,7 @@ class RecordService::Impl {
 
   private:
     // Returns false if the names must be looked up one by one.
-    bool lookUpGroup(const foundation::URL& url, const std::vector<std::string>& names,
+    bool lookUpGroup(const values::URL& url, const std::vector<std::string>& names,
                      std::vector<Answer>& answers, const Limits& limits) {
         Exchange exchange;
         {
@@ -193,19 +193,19 @@ class RecordService::Impl {
             for (Answer& answer : answers) answer = *failure;
             return true;
         }
-        const auto document = foundation::parseJSON(exchange.body);
+        const auto document = values::parseJSON(exchange.body);
         const Grouping grouping = document ? groupingOf(*document, names) : Grouping::unknown;
         if (grouping == Grouping::none) answersGroups_ = false;
         if (grouping != Grouping::inOrder) return false;
         for (std::size_t i = 0; i < names.size(); ++i) {
-            auto body = foundation::serializeJSON(Dictionary{{"records", Array{(*document)["records"][i]}}});
+            auto body = values::serializeJSON(Dictionary{{"records", Array{(*document)["records"][i]}}});
             if (!body) return false;
             answers[i] = answerOf(exchange, *std::move(body));
         }
         return true;
     }
 
-    void lookUpOneByOne(const foundation::URL& url, const std::vector<std::string>& names,
+    void lookUpOneByOne(const values::URL& url, const std::vector<std::string>& names,
                         std::vector<Answer>& answers, const Limits& limits) {
         std::vector<std::size_t> all(names.size());
         for (std::size_t i = 0; i < all.size(); ++i) all[i] = i;

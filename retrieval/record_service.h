@@ -13,7 +13,7 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "https/session.h"
 #include "retrieval/connection.h"
 #include "retrieval/retry_policy.h"
@@ -39,16 +39,16 @@ struct Answer {
     /// The response as if this record alone had been looked up; set if the outcome is `answered`. Its request
     /// identifier is the service's with a number of ours, so that it is unique in the process.
     std::optional<https::HTTPResponse> response;
-    foundation::Data body;
+    base::Data body;
 
     /// The file that the record names instead of a ticket; `nullopt` if it names none, or its URL is invalid.
     struct Asset {
         https::HTTPResponse response;
-        foundation::Data contents;
+        base::Data contents;
     };
     std::optional<Asset> asset;
 
-    std::optional<foundation::Error> error;
+    std::optional<base::Error> error;
     bool errorIsOfAsset = false;  // the lookup succeeded, the asset's download failed
 
     /// The delay that the service asks for.

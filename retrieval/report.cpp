@@ -4,8 +4,9 @@
 #include <array>
 #include <nlohmann/json.hpp>
 
-#include "foundation/format.h"
+#include "base/text.h"
 #include "src/PWHashedFile/PWHashedFile.h"
+#include "values/format.h"
 
 namespace pinwell::retrieval {
 namespace {
@@ -111,8 +112,8 @@ std::string lastWords(const Report& report) {
     const bool wasCutShort = report.cause == Cause::timedOut || report.cause == Cause::interrupted;
     if (last != report.messages.rend() && !wasCutShort) return *last;
     const std::string action(actionOf(report.operation));
-    if (report.cause == Cause::worked) return foundation::format("The %@ action worked!", action);
-    return foundation::format("The %@ action failed! Error %d.", action, report.exitStatus);
+    if (report.cause == Cause::worked) return values::format("The %@ action worked!", action);
+    return values::format("The %@ action failed! Error %d.", action, report.exitStatus);
 }
 
 }  // namespace
@@ -134,7 +135,7 @@ std::string asText(const Report& report, bool isVerbose, bool inColor) {
     if (isVerbose)
         for (const std::string& message : report.messages) text += "  " + message + "\n";
     const bool worked = report.cause == Cause::worked;
-    text += foundation::escapeForTerminal(report.path.empty() ? report.recordName : report.path) + ": ";
+    text += base::escapeForTerminal(report.path.empty() ? report.recordName : report.path) + ": ";
     if (inColor) text += worked ? kGreen : kRed;
     text += lastWords(report);
     if (!worked) text += " (" + std::string(nameOf(report.cause)) + ")";

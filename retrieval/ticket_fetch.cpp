@@ -5,14 +5,13 @@
 #include <stdexcept>
 #include <utility>
 
+#include "base/text.h"
 #include "formats/explain_ticket.h"
-#include "foundation/base64.h"
-#include "foundation/hex.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/messages.h"
 #include "src/ticket_record.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::retrieval {
 namespace {
@@ -36,14 +35,14 @@ bool isAnnounced(const Answer::Asset& asset, const TicketRecord& record, Fetched
         case AssetFault::length:
             result.end(
                 Cause::notAcceptable, kExitDataError,
-                foundation::format("We were expecting a ticket size of %@ but download a ticket of size %lu",
-                                   record.assetSize, asset.contents.size()));
+                values::format("We were expecting a ticket size of %@ but download a ticket of size %lu",
+                               record.assetSize, asset.contents.size()));
             return false;
         case AssetFault::status:
-            result.end(Cause::unreachable, kExitNoHost,
-                       foundation::format("Attempting to download larger ticket for %@ failed. %@",
-                                          result.recordName,
-                                          https::localizedStringForStatusCode(asset.response.status)));
+            result.end(
+                Cause::unreachable, kExitNoHost,
+                values::format("Attempting to download larger ticket for %@ failed. %@", result.recordName,
+                               https::localizedStringForStatusCode(asset.response.status)));
             return false;
         case AssetFault::none:
             break;
@@ -53,15 +52,15 @@ bool isAnnounced(const Answer::Asset& asset, const TicketRecord& record, Fetched
 
 // Takes the ticket from a record. Throws as ticketRecordOf() if the response has another form.
 void takeTicket(const Answer& answer, FetchedTicket& result, trust::TrustService& trust) {
-    const auto document = foundation::parseJSON(answer.body);
-    const TicketRecord record = ticketRecordOf(document ? *document : foundation::Value());
-    std::optional<foundation::Data> ticket;
+    const auto document = values::parseJSON(answer.body);
+    const TicketRecord record = ticketRecordOf(document ? *document : values::Value());
+    std::optional<base::Data> ticket;
     if (const std::string* const text = record.ticketText()) {
-        ticket = foundation::decodeBase64(*text);
+        ticket = base::decodeBase64(*text);
     } else if (record.assetURLTemplate() == nullptr) {
-        return result.end(Cause::notIssued, kExitDataError,
-                          foundation::format("Lumora query for %@ failed due to \"%@\".", result.recordName,
-                                             record.reason));
+        return result.end(
+            Cause::notIssued, kExitDataError,
+            values::format("Lumora query for %@ failed due to \"%@\".", result.recordName, record.reason));
     } else if (answer.asset) {
         if (!isAnnounced(*answer.asset, record, result)) return;
         ticket = answer.asset->contents;
@@ -76,23 +75,22 @@ void takeAnswer(const Answer& answer, FetchedTicket& result, trust::TrustService
     result.ticket.clear();
     if (answer.error) {
         result.end(answer.kind == Answer::Kind::untrusted ? Cause::untrusted : Cause::unreachable,
-                   kExitNoHost, foundation::format("error is %@", answer.error));
+                   kExitNoHost, values::format("error is %@", answer.error));
         return;
     }
     if (answer.body.empty()) {
-        result.end(
-            Cause::unreachable, kExitNoHost,
-            foundation::format("Lumora's response is inconsistent with expections: %@", answer.response));
+        result.end(Cause::unreachable, kExitNoHost,
+                   values::format("Lumora's response is inconsistent with expections: %@", answer.response));
         return;
     }
     const auto refuseForm = [&result] {
         result.end(
             Cause::notAcceptable, kExitDataError,
-            foundation::format("Lumora query for %@ did not return expected JSON data.", result.recordName));
+            values::format("Lumora query for %@ did not return expected JSON data.", result.recordName));
     };
     try {
         takeTicket(answer, result, trust);
-    } catch (const foundation::ValueTypeError&) {
+    } catch (const values::ValueTypeError&) {
         refuseForm();
     } catch (const std::out_of_range&) {
         refuseForm();
@@ -154,7 +152,7 @@ class Fetch {
                 continue;
             }
             fresh.result.end(Cause::notIssued, kExitDataError,
-                             foundation::format("%@ is not the name of a record.", fresh.result.recordName));
+                             values::format("%@ is not the name of a record.", fresh.result.recordName));
             end(fresh);
         }
         return group;
@@ -218,8 +216,8 @@ void FetchedTicket::end(Cause itsCause, int itsStatus, std::string message) {
     messages.push_back(std::move(message));
 }
 
-void FetchedTicket::take(std::optional<foundation::Data> received,
-                         const std::vector<foundation::Data>& hashes, trust::TrustService& trust) {
+void FetchedTicket::take(std::optional<base::Data> received, const std::vector<base::Data>& hashes,
+                         trust::TrustService& trust) {
     const auto own = [&] { return std::optional(hashes.front()); };  // found without sorting the list
     switch (hashes.size() == 1 ? judgeTicket(received, own, trust) : judgeTicket(received, hashes, trust)) {
         case TicketVerdict::acceptable:
@@ -228,26 +226,25 @@ void FetchedTicket::take(std::optional<foundation::Data> received,
             break;
         case TicketVerdict::revoked:
             end(Cause::revoked, kExitNoPermission,
-                foundation::format(
-                    "The ticket for %@ has been revoked. Tollmark will prevent it from running.",
-                    recordName));
+                values::format("The ticket for %@ has been revoked. Tollmark will prevent it from running.",
+                               recordName));
             break;
         case TicketVerdict::refused:
             return end(Cause::notAcceptable, kExitDataError,
-                       foundation::format("Could not validate ticket for %@: %@.", recordName,
-                                          ruleBrokenByTicket(received, hashes, trust)));
+                       values::format("Could not validate ticket for %@: %@.", recordName,
+                                      ruleBrokenByTicket(received, hashes, trust)));
     }
     ticket = *std::move(received);
 }
 
-std::string ruleBrokenByTicket(const std::optional<foundation::Data>& ticket,
-                               const std::vector<foundation::Data>& hashes, trust::TrustService& trust) {
+std::string ruleBrokenByTicket(const std::optional<base::Data>& ticket, const std::vector<base::Data>& hashes,
+                               trust::TrustService& trust) {
     if (!ticket) return "its text is not base64";
     const auto refusal = explain_ticket(*ticket, hashes.front(), trust);
     return refusal ? refusal->reason : "the ticket does not list every hash of the artefact";
 }
 
-std::optional<foundation::Data> hashInRecordName(std::string_view name) {
+std::optional<base::Data> hashInRecordName(std::string_view name) {
     if (name.starts_with("1/")) {
         name.remove_prefix(2);
     } else if (name.starts_with("2/")) {
@@ -264,7 +261,7 @@ std::optional<foundation::Data> hashInRecordName(std::string_view name) {
         return std::nullopt;
     }
     if (name.size() < 2 * kShortestHash || name.size() > 2 * kLongestHash) return std::nullopt;
-    return foundation::parseHex(name);
+    return base::parseHex(name);
 }
 
 void fetchTickets(const std::vector<std::string>& names, const FetchOptions& options,

@@ -12,7 +12,7 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "retrieval/record_service.h"
 #include "retrieval/report.h"
 #include "retrieval/retry_policy.h"
@@ -40,7 +40,7 @@ struct FetchedTicket {
 
     /// The ticket's bytes: genuine, and listing the hash of the record's name (worked), or genuine and
     /// marking the software as revoked (revoked). Empty otherwise.
-    foundation::Data ticket;
+    base::Data ticket;
 
     /// For the user: why there is no ticket.
     std::vector<std::string> messages;
@@ -50,17 +50,17 @@ struct FetchedTicket {
 
     /// Judges a ticket, and ends as worked, revoked or notAcceptable. `received` is `nullopt` if its text is
     /// not base64. `hashes` are the ones that the ticket must list, the artefact's own first; never empty.
-    void take(std::optional<foundation::Data> received, const std::vector<foundation::Data>& hashes,
+    void take(std::optional<base::Data> received, const std::vector<base::Data>& hashes,
               trust::TrustService& trust);
 };
 
 /// The rule that a refused ticket breaks, without a full stop. The arguments are as in FetchedTicket::take.
-std::string ruleBrokenByTicket(const std::optional<foundation::Data>& ticket,
-                               const std::vector<foundation::Data>& hashes, trust::TrustService& trust);
+std::string ruleBrokenByTicket(const std::optional<base::Data>& ticket, const std::vector<base::Data>& hashes,
+                               trust::TrustService& trust);
 
 /// The hash in the name of a record: "2/ALGORITHM/HEX" or "1/HEX", the digits in lower case, 20 to 64 bytes
 /// of hash. `nullopt` for any other name.
-std::optional<foundation::Data> hashInRecordName(std::string_view name);
+std::optional<base::Data> hashInRecordName(std::string_view name);
 
 /// Gets each finished ticket, with the index of its name.
 using TakeFetched = std::function<void(std::size_t index, FetchedTicket ticket)>;

@@ -5,23 +5,23 @@
 #include <random>
 #include <utility>
 
+#include "base/text.h"
 #include "codesign/code_directory.h"
 #include "formats/code_hashes.h"
 #include "formats/explain_ticket.h"
-#include "foundation/base64.h"
-#include "foundation/format.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/messages.h"
+#include "values/format.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::retrieval {
 namespace {
 
-using foundation::Array;
-using foundation::Dictionary;
-using foundation::Value;
 using https::URLErrorCode;
+using values::Array;
+using values::Dictionary;
+using values::Value;
 
 constexpr std::string_view kPath = "/v1/tickets";
 constexpr std::array<std::string_view, 3> kActions{"issued", "reissued", "reinstated"};
@@ -35,11 +35,11 @@ constexpr int kStatusConflict = 409;
 constexpr std::array kLosses{URLErrorCode::cannotFindHost, URLErrorCode::cannotConnect,
                              URLErrorCode::timedOut, URLErrorCode::connectionLost, URLErrorCode::proxyFailed};
 
-bool isCode(const foundation::Error& error, URLErrorCode code) {
-    return error.domain() == foundation::kURLErrorDomain && error.code() == static_cast<std::int64_t>(code);
+bool isCode(const base::Error& error, URLErrorCode code) {
+    return error.domain() == base::kURLErrorDomain && error.code() == static_cast<std::int64_t>(code);
 }
 
-bool isLoss(const foundation::Error& error) {
+bool isLoss(const base::Error& error) {
     return std::any_of(kLosses.begin(), kLosses.end(),
                        [&error](URLErrorCode code) { return isCode(error, code); });
 }
@@ -48,29 +48,29 @@ std::string nameOf(const CodeHash& hash) {
     return recordNameForHash(hash.algorithm, hash.hash);
 }
 
-foundation::Result<foundation::Data> bodyOf(const TicketWish& wish) {
+base::Result<base::Data> bodyOf(const TicketWish& wish) {
     Array hashes;
     for (const CodeHash& hash : wish.hashes) hashes.push_back(nameOf(hash));
     Dictionary body{
         {"record", nameOf(wish.hashes.front())}, {"hashes", std::move(hashes)}, {"label", wish.label}};
     if (wish.reinstates) body.emplace("reinstate", true);
     if (!wish.comment.empty()) body.emplace("comment", wish.comment);
-    return foundation::serializeJSON(Value(std::move(body)));
+    return values::serializeJSON(Value(std::move(body)));
 }
 
 // Independent of the request's contents. A key made from the contents would return an old ticket after the
 // record was revoked.
 std::string newKey() {
     std::random_device source;
-    foundation::Data bytes;
+    base::Data bytes;
     for (int i = 0; i < 4; ++i) {
         const std::uint32_t word = source();
         for (unsigned shift = 0; shift < 32; shift += 8) bytes.push_back(std::byte(word >> shift & 0xFFU));
     }
-    return foundation::toHex(bytes);
+    return base::toHex(bytes);
 }
 
-https::Request requestFor(const foundation::URL& url, foundation::Data body) {
+https::Request requestFor(const values::URL& url, base::Data body) {
     https::Request request;
     request.url = url;
     request.method = "POST";
@@ -103,12 +103,12 @@ std::string cutTo(std::size_t length, const std::string& text) {
 // The service's description of the problem, with its status; only the status if the body is not a problem
 // document.
 std::string problemIn(const Exchange& exchange) {
-    std::string text = foundation::format("%d (%@)", exchange.response->status,
-                                          https::localizedStringForStatusCode(exchange.response->status));
+    std::string text = values::format("%d (%@)", exchange.response->status,
+                                      https::localizedStringForStatusCode(exchange.response->status));
     if (!hasType(*exchange.response, "application/problem+json")) return text;
-    const auto problem = foundation::parseJSON(exchange.body);
+    const auto problem = values::parseJSON(exchange.body);
     const std::string* const detail = problem ? textIn(*problem, "detail") : nullptr;
-    return detail == nullptr ? text : text + foundation::format(": %@", cutTo(kShownDetail, *detail));
+    return detail == nullptr ? text : text + values::format(": %@", cutTo(kShownDetail, *detail));
 }
 
 bool isHash(std::string_view text) {
@@ -118,9 +118,9 @@ bool isHash(std::string_view text) {
 
 }  // namespace
 
-std::optional<foundation::URL> serviceURLOf(std::string_view text) {
+std::optional<values::URL> serviceURLOf(std::string_view text) {
     while (text.ends_with('/')) text.remove_suffix(1);
-    const auto url = foundation::URL::fromString(std::string(text) + std::string(kPath));
+    const auto url = values::URL::fromString(std::string(text) + std::string(kPath));
     if (!url || url->scheme() != "https" || url->host().empty()) return std::nullopt;
     const bool isPlain = text.find_first_of("?#@") == std::string_view::npos;
     return isPlain ? url : std::nullopt;
@@ -149,7 +149,7 @@ RequestedTicket TicketRequests::request(const TicketWish& wish) {
     if (!body) {
         fetched.end(
             Cause::notIssued, kExitDataError,
-            foundation::format("The request for %@ cannot be written: label or comment is not UTF-8.", name));
+            values::format("The request for %@ cannot be written: label or comment is not UTF-8.", name));
         return result;
     }
     const https::Request request = requestFor(options_.service, *std::move(body));
@@ -191,7 +191,7 @@ TicketRequests::Try TicketRequests::attempt(const TicketWish& wish, const https:
         return takeResponse(wish, exchange, result);
     }
     fetched.end(exchange.serverWasRefused ? Cause::untrusted : Cause::unreachable, kExitNoHost,
-                foundation::format("error is %@", exchange.error));
+                values::format("error is %@", exchange.error));
     const bool isLost = !exchange.serverWasRefused && isLoss(*exchange.error);
     if (isLost || exchange.serverWasRefused ||
         isCode(*exchange.error, URLErrorCode::secureConnectionFailed)) {
@@ -212,17 +212,17 @@ TicketRequests::Try TicketRequests::takeResponse(const TicketWish& wish, const E
     const std::string problem = problemIn(exchange);
     if (status == kStatusConflict) {
         fetched.end(Cause::revoked, kExitNoPermission,
-                    foundation::format("No ticket was issued for %@: %@", fetched.recordName, problem));
+                    values::format("No ticket was issued for %@: %@", fetched.recordName, problem));
         return {};
     }
     if (status >= 400 && status < 500 && status != kStatusRequestTimeout && !isBusyStatus(status)) {
         fetched.end(Cause::notIssued, kExitDataError,
-                    foundation::format("No ticket was issued for %@: %@", fetched.recordName, problem));
+                    values::format("No ticket was issued for %@: %@", fetched.recordName, problem));
         return {};
     }
     fetched.end(
         Cause::unreachable, kExitNoHost,
-        foundation::format("The service cannot issue a ticket for %@ now: %@", fetched.recordName, problem));
+        values::format("The service cannot issue a ticket for %@ now: %@", fetched.recordName, problem));
     return {isBusyStatus(status) || status == kStatusRequestTimeout, retryAfterOf(*exchange.response)};
 }
 
@@ -232,7 +232,7 @@ void TicketRequests::takeIssued(const TicketWish& wish, const Exchange& exchange
     const auto refuse = [&fetched](std::string message) {
         fetched.end(Cause::notAcceptable, kExitDataError, std::move(message));
     };
-    const auto document = foundation::parseJSON(exchange.body);
+    const auto document = values::parseJSON(exchange.body);
     const Value issued = document && hasType(*exchange.response, "application/json") ? *document : Value();
     const std::string* const record = textIn(issued, "record");
     const std::string* const action = textIn(issued, "action");
@@ -240,14 +240,14 @@ void TicketRequests::takeIssued(const TicketWish& wish, const Exchange& exchange
     const std::string* const text = textIn(issued, "ticket");
     if (record == nullptr || action == nullptr || event == nullptr || text == nullptr || !isHash(*event) ||
         std::find(kActions.begin(), kActions.end(), *action) == kActions.end())
-        return refuse(foundation::format("The service's answer for %@ does not have the form of one.",
-                                         fetched.recordName));
+        return refuse(
+            values::format("The service's answer for %@ does not have the form of one.", fetched.recordName));
     if (*record != fetched.recordName)
-        return refuse(foundation::format("The service's answer for %@ is about another record, %@.",
-                                         fetched.recordName, cutTo(kShownDetail, *record)));
-    std::vector<foundation::Data> hashes;
+        return refuse(values::format("The service's answer for %@ is about another record, %@.",
+                                     fetched.recordName, cutTo(kShownDetail, *record)));
+    std::vector<base::Data> hashes;
     for (const CodeHash& hash : wish.hashes) hashes.push_back(hash.hash);
-    fetched.take(foundation::decodeBase64(*text), hashes, platform_.trust);
+    fetched.take(base::decodeBase64(*text), hashes, platform_.trust);
     if (fetched.cause == Cause::notAcceptable) return;
     result.action = *action;
     result.event = *event;

@@ -16,11 +16,11 @@
 #include <vector>
 
 #include "formats/code_hashes.h"
-#include "foundation/url.h"
 #include "retrieval/connection.h"
 #include "retrieval/retry_policy.h"
 #include "retrieval/ticket_fetch.h"
 #include "src/platform.h"
+#include "values/url.h"
 
 namespace pinwell::retrieval {
 
@@ -33,7 +33,7 @@ struct TicketWish {
 };
 
 struct RequestOptions {
-    foundation::URL service;  // "https://HOST:PORT", maybe with a path before the listener's
+    values::URL service;  // "https://HOST:PORT", maybe with a path before the listener's
     RetryPolicy retry;
 
     /// The end of all; unfinished wishes are timedOut.
@@ -52,7 +52,7 @@ struct RequestedTicket {
 
 /// The URL of the service. `nullopt` if the text is not an https URL, names a user, or has a query or a
 /// fragment.
-std::optional<foundation::URL> serviceURLOf(std::string_view text);
+std::optional<values::URL> serviceURLOf(std::string_view text);
 
 /// For one thread.
 class TicketRequests {

@@ -4,17 +4,17 @@
 #include <utility>
 #include <vector>
 
-#include "foundation/base64.h"
-#include "foundation/byte_count.h"
-#include "foundation/json.h"
-#include "foundation/process.h"
+#include "base/file_io.h"
+#include "base/text.h"
+#include "runtime/process.h"
 #include "src/messages.h"
 #include "src/ticket_record.h"
+#include "values/json.h"
 
 namespace pinwell {
 
-using foundation::Dictionary;
-using foundation::Value;
+using values::Dictionary;
+using values::Value;
 
 namespace {
 
@@ -28,11 +28,11 @@ bool isSuccess(trust::Verdict verdict) {
 }
 
 void reportRefusal(const trust::Trust& serverTrust, trust::Verdict verdict) {
-    const foundation::Array properties = serverTrust.properties();
+    const values::Array properties = serverTrust.properties();
     MessageLog("Certificate trust evaluation did not return expected result. (%d) %@",
                static_cast<std::uint32_t>(verdict), serverTrust.failureDescription().value_or(std::string()));
-    for (const foundation::Value& certificate : properties) {
-        const foundation::Value& error = certificate[trust::kPropertyError];
+    for (const values::Value& certificate : properties) {
+        const values::Value& error = certificate[trust::kPropertyError];
         if (error.isNil()) continue;
         MessageLog("Certificate trust evaluation for %@ did not return expected result. %@.",
                    certificate[trust::kPropertyTitle], error);
@@ -65,7 +65,7 @@ std::string DownloadDelegate::fileName() const {
 
 std::string DownloadDelegate::prettyHashString() {
     const Data hash = hashedFile_->cdHash().value_or(Data{});
-    return foundation::format("%d/%@", hashedFile_->digestAlgorithm(), foundation::toHex(hash));
+    return values::format("%d/%@", hashedFile_->digestAlgorithm(), base::toHex(hash));
 }
 
 // The lookup of the ticket's record: one POST to the record service, and reading its response.
@@ -134,10 +134,10 @@ void DownloadDelegate::lookupDidComplete(const std::optional<Data>& data,
     }
 
     std::string identifier = response->header(kRequestIdentifierHeader).value_or(std::string());
-    if (!foundation::isSafeFileName(identifier)) identifier = foundation::globallyUniqueString();
+    if (!base::isSafeFileName(identifier)) identifier = runtime::globallyUniqueString();
     setTempFileURL(platform_.files.temporaryDirectory().appendingPathComponent(identifier + ".ticket"));
 
-    const auto parsed = foundation::parseJSON(*data);
+    const auto parsed = values::parseJSON(*data);
     const Value answer = parsed ? *parsed : Value();
     NoisyLog("JSON Response is: %@", answer);
 
@@ -145,7 +145,7 @@ void DownloadDelegate::lookupDidComplete(const std::optional<Data>& data,
     std::optional<Data> ticket;
     try {
         ticket = ticketFromResponse(answer, downloading);
-    } catch (const foundation::ValueTypeError&) {
+    } catch (const values::ValueTypeError&) {
         MessageLog("Lumora query for %@ did not return expected JSON data.", prettyHashString());
     } catch (const std::out_of_range&) {
         MessageLog("Lumora query for %@ did not return expected JSON data.", prettyHashString());
@@ -166,7 +166,7 @@ void DownloadDelegate::lookupDidComplete(const std::optional<Data>& data,
 std::optional<Data> DownloadDelegate::ticketFromResponse(const Value& response, bool& downloading) {
     const TicketRecord record = ticketRecordOf(response);
     setLargeTicketSize(record.assetSize);
-    if (const std::string* ticket = record.ticketText()) return foundation::decodeBase64(*ticket);
+    if (const std::string* ticket = record.ticketText()) return base::decodeBase64(*ticket);
     if (const std::string* url = record.assetURLTemplate()) {
         downloading = asynchronouslyDownloadLargeTicketFromURLString(*url);
         return std::nullopt;
@@ -214,7 +214,7 @@ void DownloadDelegate::didFinishDownloading(https::Session&, https::Task& task, 
             break;
         case AssetFault::none:
             NoisyLog("Big ticket response is %@", response);
-            NoisyLog("Downloaded large ticket size is %@", foundation::formatByteCount(length));
+            NoisyLog("Downloaded large ticket size is %@", base::formatByteCount(length));
             writeDownloadedData(data, nullptr);
             break;
     }
@@ -287,7 +287,7 @@ bool DownloadDelegate::isExistingTicketValid() {
 
 void DownloadDelegate::writeDownloadedData(const std::optional<Data>& data, ErrorOut error) {
     if (!data) {
-        const Error badParameter = Error::osStatus(foundation::kParameterError);
+        const Error badParameter = Error::osStatus(base::kParameterError);
         MessageLog("Could not save data. %@", badParameter.localizedDescription());
         handOut(error, badParameter);
         return;
@@ -335,7 +335,7 @@ void DownloadDelegate::notifyResult() {
     } else {
         MessageLog("The %@ action %@!%@", operation_ == kOperationStaple ? "staple and validate" : "validate",
                    status == kExitOK ? "worked" : "failed",
-                   status == kExitOK ? std::string() : foundation::format(" Error %d.", status));
+                   status == kExitOK ? std::string() : values::format(" Error %d.", status));
     }
     platform_.exitProcess(status);
 }

@@ -11,10 +11,10 @@
 #include <optional>
 #include <string>
 
-#include "foundation/value.h"
 #include "https/session.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/platform.h"
+#include "values/value.h"
 
 namespace pinwell {
 
@@ -50,8 +50,8 @@ class DownloadDelegate : public https::SessionDelegate {
     void setTempFileURL(std::optional<URL> url) { tempFileURL_ = std::move(url); }
 
     /// The announced size of a large ticket, as in the response; nil before it.
-    const foundation::Value& largeTicketSize() const noexcept { return largeTicketSize_; }
-    void setLargeTicketSize(foundation::Value size) { largeTicketSize_ = std::move(size); }
+    const values::Value& largeTicketSize() const noexcept { return largeTicketSize_; }
+    void setLargeTicketSize(values::Value size) { largeTicketSize_ = std::move(size); }
 
     /// Keeps the artefact's lock, which may be null, until the process ends or the run is parked for good.
     void keepLock(std::unique_ptr<files::ItemLock> lock) noexcept { lock_ = std::move(lock); }
@@ -99,7 +99,7 @@ class DownloadDelegate : public https::SessionDelegate {
 
   private:
     std::string recordName();
-    std::optional<Data> ticketFromResponse(const foundation::Value& response, bool& downloading);
+    std::optional<Data> ticketFromResponse(const values::Value& response, bool& downloading);
     std::string fileName() const;
 
     std::uint8_t operation_ = kOperationNone;
@@ -107,7 +107,7 @@ class DownloadDelegate : public https::SessionDelegate {
     bool force_ = false;
     std::shared_ptr<PWHashedFile> hashedFile_;
     std::optional<URL> tempFileURL_;
-    foundation::Value largeTicketSize_;
+    values::Value largeTicketSize_;
 
     std::unique_ptr<files::ItemLock> lock_;
 

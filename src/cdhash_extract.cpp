@@ -2,19 +2,19 @@
 
 namespace pinwell {
 
-using foundation::Dictionary;
-using foundation::Value;
+using values::Dictionary;
+using values::Value;
 
 namespace {
 
 template <class T>
-codesign::Status statusOf(const foundation::Result<T>& result) {
+codesign::Status statusOf(const base::Result<T>& result) {
     return result ? codesign::kSuccess : result.error().statusOr(codesign::kInvalidSignature);
 }
 
 }  // namespace
 
-foundation::Dictionary basicCodeProperties(const foundation::URL& fileURL, const Platform& platform) {
+values::Dictionary basicCodeProperties(const values::URL& fileURL, const Platform& platform) {
     const auto code = platform.codeSigning.staticCode(fileURL, 0);
     if (!code || *code == nullptr) {
         platform.systemLog.error("Unable to create SecCode (%d): %@", statusOf(code), fileURL.path());
@@ -50,13 +50,13 @@ foundation::Dictionary basicCodeProperties(const foundation::URL& fileURL, const
     if (information->digestAlgorithm) store(kDigestAlgorithmKey, *information->digestAlgorithm);
     if (information->teamIdentifier) store(kTeamIdKey, *information->teamIdentifier);
     if (information->secureTimestamp)
-        store(kSecureTimestampKey, foundation::format("%@", *information->secureTimestamp));
+        store(kSecureTimestampKey, values::format("%@", *information->secureTimestamp));
     if (information->identifier) store(kSigningIdKey, *information->identifier);
     if (information->flags) store(kFlagsKey, *information->flags);
     return properties;
 }
 
-std::vector<CodeHash> listableHashes(const CodeHash& own, const foundation::URL& artefact,
+std::vector<CodeHash> listableHashes(const CodeHash& own, const values::URL& artefact,
                                      const codesign::CodeSigningService& codeSigning) {
     const auto all = codeSigning.allCodeHashes(artefact);
     if (!all) return {own};

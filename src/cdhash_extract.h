@@ -4,9 +4,9 @@
 #include <vector>
 
 #include "formats/code_hashes.h"
-#include "foundation/url.h"
-#include "foundation/value.h"
 #include "src/platform.h"
+#include "values/url.h"
+#include "values/value.h"
 
 namespace pinwell {
 
@@ -21,12 +21,12 @@ inline constexpr std::string_view kFlagsKey = "flags";                      // n
 /// The properties of the code at `fileURL`; empty on any failure. An invalid or missing signature is not
 /// reported; a failure of the code-signing service itself goes to the system log. Never prints, never changes
 /// an exit code.
-foundation::Dictionary basicCodeProperties(const foundation::URL& fileURL, const Platform& platform);
+values::Dictionary basicCodeProperties(const values::URL& fileURL, const Platform& platform);
 
 /// The hashes that a ticket with this own hash can list (code_hashes.h): those of all slices and of nested
 /// code of the artefact at this path. An unsigned disk image or a package has only its own. Reads files;
 /// blocks.
-std::vector<CodeHash> listableHashes(const CodeHash& own, const foundation::URL& artefact,
+std::vector<CodeHash> listableHashes(const CodeHash& own, const values::URL& artefact,
                                      const codesign::CodeSigningService& codeSigning);
 
 }  // namespace pinwell

@@ -6,8 +6,7 @@
 #include <optional>
 
 #include "defaults/user_defaults.h"
-#include "foundation/lazy_library.h"
-#include "foundation/process.h"
+#include "runtime/process.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/messages.h"
@@ -17,9 +16,9 @@
 namespace pinwell {
 namespace {
 
-using foundation::URL;
 using sandbox::Access;
 using sandbox::FileRules;
+using values::URL;
 
 // How much of a bundle is read (its executable's signature, property lists, the ticket) is not known before.
 // An executable of this size has a signature of 5 MiB.
@@ -40,7 +39,7 @@ void addArtefact(FileRules& rules, const URL& artefact, Access access) {
         {(S_ISDIR(status->st_mode) ? artefact : artefact.deletingLastPathComponent()).path(), access});
 }
 
-FileRules commonFiles(const foundation::PlatformDirectory& platform) {
+FileRules commonFiles(const config::PlatformDirectory& platform) {
     FileRules rules = sandbox::filesWithLinks(platform.path());
     append(rules, sandbox::libraryFiles());
     append(rules, sandbox::typeDatabaseFiles());
@@ -48,12 +47,12 @@ FileRules commonFiles(const foundation::PlatformDirectory& platform) {
 }
 
 // The rights of a program that asks the record service.
-sandbox::Confinement withNetwork(const foundation::PlatformDirectory& platform) {
+sandbox::Confinement withNetwork(const config::PlatformDirectory& platform) {
     sandbox::Confinement confinement;
     confinement.network = sandbox::Network::connect;
     confinement.files = commonFiles(platform);
     append(confinement.files, sandbox::nameResolutionFiles());
-    confinement.files.push_back({foundation::temporaryDirectory().path(), Access::write});
+    confinement.files.push_back({runtime::temporaryDirectory().path(), Access::write});
     if (auto defaults = defaults::domainFile(kDefaultsDomain))
         confinement.files.push_back({*std::move(defaults), Access::read});
     return confinement;
@@ -66,14 +65,14 @@ Access accessOf(std::uint8_t operation) {
 }  // namespace
 
 sandbox::Confinement confinementOfRun(std::uint8_t operation, const URL& artefact,
-                                      const foundation::PlatformDirectory& platform) {
+                                      const config::PlatformDirectory& platform) {
     sandbox::Confinement confinement = withNetwork(platform);
     addArtefact(confinement.files, artefact, accessOf(operation));
     return confinement;
 }
 
 sandbox::Confinement confinementOfRuns(std::uint8_t operation, const std::vector<std::string>& artefacts,
-                                       const foundation::PlatformDirectory& platform) {
+                                       const config::PlatformDirectory& platform) {
     sandbox::Confinement confinement = withNetwork(platform);
     for (const std::string& path : artefacts)
         addArtefact(confinement.files, URL::fileURLWithPath(path), accessOf(operation));
@@ -81,7 +80,7 @@ sandbox::Confinement confinementOfRuns(std::uint8_t operation, const std::vector
 }
 
 sandbox::Confinement confinementOfReading(const std::vector<std::string>& artefacts,
-                                          const foundation::PlatformDirectory& platform) {
+                                          const config::PlatformDirectory& platform) {
     sandbox::Confinement confinement;
     confinement.calls = sandbox::Calls::reading;
     confinement.files = commonFiles(platform);
@@ -92,7 +91,7 @@ sandbox::Confinement confinementOfReading(const std::vector<std::string>& artefa
 }
 
 void keepSecurityLibrary() {
-    static const foundation::LazyLibrary library(trust::kSecurityLibrary);
+    static const runtime::LazyLibrary library(trust::kSecurityLibrary);
 }
 
 std::uint64_t processorSecondsForArtefact(const URL& artefact) {
@@ -104,9 +103,8 @@ std::uint64_t processorSecondsForArtefact(const URL& artefact) {
 void limitRun(const URL& artefact) {
     sandbox::RunawayEnd end;
     end.descriptor = verboseLevel == kVerbosityQuiet ? -1 : STDOUT_FILENO;
-    end.processorTime =
-        foundation::format("Gave up on %@: it takes too much processor time.", artefact.path());
-    end.stack = foundation::format("Gave up on %@: it is nested too deeply.", artefact.path());
+    end.processorTime = values::format("Gave up on %@: it takes too much processor time.", artefact.path());
+    end.stack = values::format("Gave up on %@: it is nested too deeply.", artefact.path());
     end.exitStatus = &lastRecordedFailure();
     sandbox::limitRunaways(processorSecondsForArtefact(artefact), std::move(end));
 }

@@ -9,9 +9,9 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/process.h"
-#include "foundation/run_loop.h"
-#include "foundation/stack_guard.h"
+#include "runtime/process.h"
+#include "runtime/queue.h"
+#include "runtime/signals.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"
@@ -34,8 +34,8 @@ constexpr option options[] = {
 };
 
 void printUsage() {
-    const std::string program = foundation::processName();
-    const std::string usage = foundation::format(
+    const std::string program = runtime::processName();
+    const std::string usage = values::format(
         "Usage: %s staple [-q] [-v] path\n"
         "        Retrieves a ticket and attaches it to the supported file\n"
         "        format at path.\n"
@@ -81,7 +81,7 @@ std::uint8_t operationForCommand(std::string_view command) {
 int main(int argc, char** argv) {
     // The threads of a run take turns: a second heap would only cost more new memory.
     mallopt(M_ARENA_MAX, 1);
-    foundation::occupyStandardStreams();
+    runtime::occupyStandardStreams();
     // A closed pipe must not stop a staple half-way.
     std::signal(SIGPIPE, SIG_IGN);
     // The same for a file that would exceed the caller's limit: the write then fails with an error.
@@ -104,11 +104,11 @@ int main(int argc, char** argv) {
     const URL artefact = URL::fileURLWithPath(path);
     const HostPlatform host([](int status) { std::exit(status); });
     limitRun(artefact);
-    const foundation::StackGuard guard;
+    const runtime::StackGuard guard;
     keepSecurityLibrary();
     for (const std::string& missing :
          sandbox::confine(confinementOfRun(operation, artefact, host.services().directory)))
         NoisyLog("%@.", missing);
-    foundation::RunLoop mainRunLoop;
+    runtime::RunLoop mainRunLoop;
     return runOperation(operation, artefact, host.services(), [&] { mainRunLoop.run(); });
 }

@@ -9,7 +9,7 @@
 #include <string>
 
 #include "formats/findings.h"
-#include "foundation/format.h"
+#include "values/format.h"
 
 namespace pinwell {
 
@@ -45,15 +45,15 @@ void writeMessageLine(std::string line);
 
 /// A diagnostic line, shown in verbose mode only.
 template <class... Args>
-void NoisyLog(foundation::FormatString<std::type_identity_t<Args>...> format, const Args&... args) {
-    if (verboseLevel == kVerbosityVerbose) writeMessageLine(foundation::format(format, args...));
+void NoisyLog(values::FormatString<std::type_identity_t<Args>...> format, const Args&... args) {
+    if (verboseLevel == kVerbosityVerbose) writeMessageLine(values::format(format, args...));
 }
 
 /// A line for the user, shown unless quiet.
 template <class... Args>
-void MessageLog(foundation::FormatString<std::type_identity_t<Args>...> format, const Args&... args) {
+void MessageLog(values::FormatString<std::type_identity_t<Args>...> format, const Args&... args) {
     if (verboseLevel != kVerbosityQuiet || messagesAreRedirected())
-        writeMessageLine(foundation::format(format, args...));
+        writeMessageLine(values::format(format, args...));
 }
 
 /// For a parser: its lines are diagnostic lines of this program, as by NoisyLog.

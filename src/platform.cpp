@@ -6,7 +6,7 @@
 namespace pinwell {
 
 HostPlatform::HostPlatform(std::function<void(int)> exitProcess, Connections connections)
-    : directory_(foundation::PlatformDirectory::current()),
+    : directory_(config::PlatformDirectory::current()),
       systemLog_(syslog::makeSystemLog()),
       types_(types::makeTypeService()),
       files_(files::makeLocalFileManager(

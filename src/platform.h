@@ -5,9 +5,9 @@
 #include <memory>
 
 #include "codesign/code_signing.h"
+#include "config/platform_directory.h"
 #include "defaults/user_defaults.h"
 #include "files/file_manager.h"
-#include "foundation/platform_directory.h"
 #include "https/session.h"
 #include "syslog/system_log.h"
 #include "trust/trust.h"
@@ -24,7 +24,7 @@ struct Platform {
     https::SessionService& https;
     defaults::UserDefaultsService& userDefaults;
     syslog::SystemLog& systemLog;
-    const foundation::PlatformDirectory& directory;
+    const config::PlatformDirectory& directory;
 
     /// Ends the process with a status; does not return. A test may throw from it instead.
     std::function<void(int)> exitProcess;
@@ -49,7 +49,7 @@ class HostPlatform {
 
   private:
     // In the order of their dependencies.
-    const foundation::PlatformDirectory directory_;
+    const config::PlatformDirectory directory_;
     const std::unique_ptr<syslog::SystemLog> systemLog_;
     const std::unique_ptr<types::TypeService> types_;
     const std::unique_ptr<files::FileManager> files_;

@@ -5,8 +5,8 @@
 #include <functional>
 #include <memory>
 
-#include "foundation/url.h"
 #include "src/platform.h"
+#include "values/url.h"
 
 namespace pinwell {
 
@@ -15,8 +15,7 @@ namespace pinwell {
 /// (PWHashedFile::BeforeReading). Returns false, with a message, only if another process holds the lock.
 /// Without a lock (the file system has none, or its locks would block others) the run goes on: every write
 /// checks the file's state again.
-bool lockArtefact(const Platform& platform, const foundation::URL& path,
-                  std::unique_ptr<files::ItemLock>& lock);
+bool lockArtefact(const Platform& platform, const values::URL& path, std::unique_ptr<files::ItemLock>& lock);
 
 /// The exit status of a run that started nothing and recorded no other.
 inline constexpr int kExitNothingRecorded = 1;
@@ -26,7 +25,7 @@ inline constexpr int kExitNothingRecorded = 1;
 /// The controller ends a run that reaches the network, from another thread, through the
 /// platform's exitProcess. This thread waits in `waitForEnd` until then; if that returns, the
 /// status is 0.
-int runOperation(std::uint8_t operation, const foundation::URL& path, const Platform& platform,
+int runOperation(std::uint8_t operation, const values::URL& path, const Platform& platform,
                  const std::function<void()>& waitForEnd);
 
 }  // namespace pinwell

@@ -2,14 +2,14 @@
 
 #include <utility>
 
-#include "foundation/json.h"
+#include "values/json.h"
 
 namespace pinwell {
 
-using foundation::Array;
-using foundation::Dictionary;
-using foundation::URL;
-using foundation::Value;
+using values::Array;
+using values::Dictionary;
+using values::URL;
+using values::Value;
 
 namespace {
 
@@ -28,19 +28,19 @@ URL lookupURLForHost(const std::string& host, std::string_view container, std::s
     // The host was checked when it was read, so this is a valid URL with any container.
     return URL::fromString("https://" + host)
         ->appendingPathComponent(
-            foundation::format("database/1/%@/%@/public/records/lookup", container, environment));
+            values::format("database/1/%@/%@/public/records/lookup", container, environment));
 }
 
 // A member that must be text if it exists.
 const std::string* textOrNil(const Value& value) {
     if (value.isNil()) return nullptr;
-    if (value.string() == nullptr) throw foundation::ValueTypeError("a text was expected");
+    if (value.string() == nullptr) throw values::ValueTypeError("a text was expected");
     return value.string();
 }
 
 }  // namespace
 
-foundation::Result<URL> lookupURL(const Platform& platform) {
+base::Result<URL> lookupURL(const Platform& platform) {
     const auto host = platform.directory.lumoraHost();
     if (!host) return host.error();
     if (!platform.directory.allowsInternalSecurityPolicies())
@@ -60,7 +60,7 @@ Value lookupBody(const std::vector<std::string>& recordNames) {
 }
 
 std::optional<https::Request> lookupRequest(std::optional<URL> url, const Value& body) {
-    auto serialized = foundation::serializeJSON(body);
+    auto serialized = values::serializeJSON(body);
     if (!serialized) return std::nullopt;
     https::Request request;
     request.url = std::move(url);

@@ -16,12 +16,12 @@
 #include <string_view>
 #include <vector>
 
+#include "base/bytes.h"
 #include "formats/code_hashes.h"
-#include "foundation/bytes.h"
-#include "foundation/url.h"
-#include "foundation/value.h"
 #include "https/session.h"
 #include "src/platform.h"
+#include "values/url.h"
+#include "values/value.h"
 
 namespace pinwell {
 
@@ -33,33 +33,32 @@ inline constexpr std::string_view kDefaultsDomain = "com.ostrel.tm.pinwell";
 
 /// The URL of lookups: the platform directory's host, and the container and environment of the user defaults
 /// if the build variant allows them. The error names the fault of platform.json.
-foundation::Result<foundation::URL> lookupURL(const Platform& platform);
+base::Result<values::URL> lookupURL(const Platform& platform);
 
 /// The body of a lookup of these records, in their order.
-foundation::Value lookupBody(const std::vector<std::string>& recordNames);
+values::Value lookupBody(const std::vector<std::string>& recordNames);
 
 /// The POST that looks these records up. Without a URL, the request does not start. `nullopt` if a name is
 /// not UTF-8.
-std::optional<https::Request> lookupRequest(std::optional<foundation::URL> url,
-                                            const foundation::Value& body);
+std::optional<https::Request> lookupRequest(std::optional<values::URL> url, const values::Value& body);
 
 /// The members of a record that are read; nil if missing.
 struct TicketRecord {
-    foundation::Value ticket;
-    foundation::Value assetURL;  // ignored if there is a ticket
-    foundation::Value assetSize;
-    foundation::Value reason;
+    values::Value ticket;
+    values::Value assetURL;  // ignored if there is a ticket
+    values::Value assetSize;
+    values::Value reason;
 
-    /// The ticket in base64. Null if there is none. Throws foundation::ValueTypeError if it is not text.
+    /// The ticket in base64. Null if there is none. Throws values::ValueTypeError if it is not text.
     const std::string* ticketText() const;
 
     /// The template of the asset's URL. Null if there is none or it is empty. Throws as ticketText().
     const std::string* assetURLTemplate() const;
 };
 
-/// The first record of a response. Throws foundation::ValueTypeError or std::out_of_range if the response has
+/// The first record of a response. Throws values::ValueTypeError or std::out_of_range if the response has
 /// another shape.
-TicketRecord ticketRecordOf(const foundation::Value& response);
+TicketRecord ticketRecordOf(const values::Value& response);
 
 /// The faults of a downloaded asset, checked in this order.
 enum class AssetFault : std::uint8_t {
@@ -67,7 +66,7 @@ enum class AssetFault : std::uint8_t {
     length,  // not the length in the record; a missing length means 0
     status,  // the status is not 200
 };
-AssetFault faultOfAsset(const foundation::Value& announcedSize, std::size_t length,
+AssetFault faultOfAsset(const values::Value& announcedSize, std::size_t length,
                         const std::optional<https::HTTPResponse>& response);
 
 /// The text of an asset's URL: the template with a file name in place of each "${f}".

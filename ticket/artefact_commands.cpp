@@ -3,7 +3,7 @@
 #include <nlohmann/json.hpp>
 #include <utility>
 
-#include "foundation/format.h"
+#include "base/text.h"
 #include "retrieval/artefact_run.h"
 #include "retrieval/ticket_fetch.h"
 #include "src/DownloadDelegate.h"
@@ -11,6 +11,7 @@
 #include "ticket/command_parts.h"
 #include "ticket/commands.h"
 #include "ticket/ticket_files.h"
+#include "values/format.h"
 
 namespace pinwell::ticket_files {
 namespace {
@@ -26,7 +27,7 @@ std::string hashJson(const OpenedArtefact& artefact) {
                        {"kind", hasKind ? Json(nameOf(report.kind)) : Json(nullptr)},
                        {"recordName", hasHash ? Json(report.recordName) : Json(nullptr)},
                        {"digestAlgorithm", hasHash ? Json(artefact.algorithm) : Json(nullptr)},
-                       {"hash", hasHash ? Json(foundation::toHex(artefact.hash)) : Json(nullptr)},
+                       {"hash", hasHash ? Json(base::toHex(artefact.hash)) : Json(nullptr)},
                        {"exitStatus", report.exitStatus},
                        {"cause", nameOf(report.cause)},
                        {"messages", report.messages}};
@@ -49,17 +50,17 @@ void extractTicket(OpenedArtefact& artefact, const std::optional<std::string>& o
     const std::string name = artefact.file->fileURL()->lastPathComponent();
     if (!ticket)
         return end(report, kExitDataError, Cause::notStapled,
-                   foundation::format("%@ does not have a ticket stapled to it.", name));
+                   values::format("%@ does not have a ticket stapled to it.", name));
     if (!output && artefact.hash.empty())
         return end(report, kExitNoInput, Cause::notSigned,
-                   foundation::format("%@ has no hash to name the file by; name one with -o.", name));
+                   values::format("%@ has no hash to name the file by; name one with -o.", name));
     const std::string path = output.value_or(fileNameOfRecord(report.recordName));
     report.file = path;
     if (const auto written = writeNewFile(*ticket, path); !written)
         return end(report, kExitCannotCreate, Cause::notWritable,
-                   foundation::format("Could not write the ticket to %@. %@", path,
-                                      written.error().localizedFailureReason()));
-    report.messages.push_back(foundation::format("The ticket has been written to %@.", path));
+                   values::format("Could not write the ticket to %@. %@", path,
+                                  written.error().localizedFailureReason()));
+    report.messages.push_back(values::format("The ticket has been written to %@.", path));
 }
 
 }  // namespace
@@ -72,7 +73,7 @@ int hash(const Settings& settings, const Platform& platform) {
         if (settings.asJson)
             reporter.line(hashJson(artefact), status);
         else if (status == kExitOK)
-            reporter.line(artefact.report.recordName + "  " + foundation::escapeForTerminal(path), status);
+            reporter.line(artefact.report.recordName + "  " + base::escapeForTerminal(path), status);
         else
             reporter.complain(asText(artefact.report, settings.isVerbose, false), status);
     }

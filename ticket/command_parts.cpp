@@ -7,10 +7,10 @@
 #include <utility>
 
 #include "companion/process.h"
-#include "foundation/format.h"
 #include "retrieval/artefact_run.h"
 #include "src/messages.h"
 #include "src/ticket_record.h"
+#include "values/format.h"
 
 namespace pinwell::ticket_files {
 
@@ -80,7 +80,7 @@ OpenedArtefact openArtefact(const std::string& path, std::string_view operation,
     opened.report.exitStatus = kExitNoInput;
     opened.report.cause = Cause::notReadable;
     if (!retrieval::isPath(path)) {
-        opened.report.messages.push_back(foundation::format("%@ is no path: it holds a zero byte.", path));
+        opened.report.messages.push_back(values::format("%@ is no path: it holds a zero byte.", path));
         return opened;
     }
     const auto file = PWHashedFile::initWithFileURL(URL::fileURLWithPath(path), platform, beforeReading);

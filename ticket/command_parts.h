@@ -7,8 +7,8 @@
 #include <string>
 #include <string_view>
 
+#include "base/bytes.h"
 #include "companion/streams.h"
-#include "foundation/bytes.h"
 #include "retrieval/report.h"
 #include "retrieval/retry_policy.h"
 #include "retrieval/ticket_fetch.h"
@@ -53,7 +53,7 @@ struct OpenedArtefact {
     retrieval::Report report;
     std::shared_ptr<PWHashedFile> file;
     std::uint32_t algorithm = 0;
-    foundation::Data hash;  // empty if it has none
+    base::Data hash;  // empty if it has none
 };
 
 /// `operation` is the command's name. `beforeReading`, if given, is called when the kind is known and nothing

@@ -120,7 +120,7 @@ class Fetching {
     const Platform platform_;
     Reporter reporter_;
     std::optional<TicketDirectory> directory_;
-    foundation::FileDescriptor signals_;
+    base::FileDescriptor signals_;
     std::atomic<int> signal_ = 0;  // the signal that ended the run
     std::set<std::string> known_;
     std::vector<std::string> names_;

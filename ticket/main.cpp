@@ -10,12 +10,12 @@
 #include <utility>
 #include <vector>
 
+#include "base/text.h"
 #include "companion/command_line.h"
 #include "crypto/crypto.h"
-#include "foundation/process.h"
-#include "foundation/utf8.h"
 #include "https/session.h"
 #include "retrieval/ticket_request.h"
+#include "runtime/process.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"
@@ -123,7 +123,7 @@ std::optional<int> refuseRequest(const Settings& settings) {
         return refuse("--label is for one artefact");
     if (settings.reinstates && !settings.comment) return refuse("--reinstate needs --comment TEXT");
     for (const auto& one : {settings.label, settings.comment})
-        if (one && !foundation::isUTF8(*one)) return refuse("--label and --comment are in UTF-8");
+        if (one && !base::isUTF8(*one)) return refuse("--label and --comment are in UTF-8");
     return std::nullopt;
 }
 
@@ -145,7 +145,7 @@ std::optional<int> refuseUsage(const std::string& command, const Settings& setti
 // Only the rights that the command needs. The trash may be anywhere on an artefact's volume, and the paths of
 // a list are not known yet.
 sandbox::Confinement rightsFor(const std::string& command, const Settings& settings,
-                               const foundation::PlatformDirectory& platform) {
+                               const config::PlatformDirectory& platform) {
     using sandbox::Access;
     const auto directoryOf = [](const std::string& path) {
         return URL::fileURLWithPath(path).deletingLastPathComponent().path();
@@ -218,7 +218,7 @@ int run(int argc, char** argv) {
 int main(int argc, char** argv) {
     mallopt(M_ARENA_MAX, 1);
     crypto::wipeWhatOpenSSLFrees();
-    foundation::occupyStandardStreams();
+    runtime::occupyStandardStreams();
     // A closed pipe, and a file that would exceed the caller's limit, become failed writes.
     std::signal(SIGPIPE, SIG_IGN);
     std::signal(SIGXFSZ, SIG_IGN);

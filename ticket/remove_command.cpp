@@ -1,6 +1,5 @@
 // The command that removes tickets.
 #include "formats/package_trailers.h"
-#include "foundation/format.h"
 #include "retrieval/artefact_run.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
@@ -8,6 +7,7 @@
 #include "src/run.h"
 #include "ticket/command_parts.h"
 #include "ticket/commands.h"
+#include "values/format.h"
 
 namespace pinwell::ticket_files {
 namespace {
@@ -93,31 +93,30 @@ retrieval::Report removeTicket(const std::string& path, const Platform& platform
     };
     if (!artefact.file->ticketData())
         return end(kExitDataError, Cause::notStapled,
-                   foundation::format("%@ does not have a ticket stapled to it.", name));
+                   values::format("%@ does not have a ticket stapled to it.", name));
     std::optional<Error> error;
     const auto file = remover(artefact.file, platform);
     if (!deleteTicket(*file, error))
         return end(kExitCannotCreate, file->wasRefusedAsChanged() ? Cause::changed : Cause::notWritable,
-                   error ? foundation::format("The ticket of %@ could not be removed. %@", name, error)
-                         : foundation::format("The ticket of %@ could not be removed.", name));
+                   error ? values::format("The ticket of %@ could not be removed. %@", name, error)
+                         : values::format("The ticket of %@ could not be removed.", name));
     // Reads the result from the disk, with a new object.
     const auto fresh = PWHashedFile::initWithFileURL(URL::fileURLWithPath(path), platform);
     if (fresh == nullptr || fresh->appropriateExitCode() != kExitOK)
         return end(kExitCannotCreate, Cause::notWritable,
-                   foundation::format("%@ cannot be read any more. Please restore it from backup.", name));
+                   values::format("%@ cannot be read any more. Please restore it from backup.", name));
     if (fresh->ticketData()) {
         // A disk image whose signature holds only the ticket: a signature is never removed.
         return end(
             kExitOK, Cause::worked,
-            foundation::format("The ticket of %@ is all that its signature holds: it stays in place.", name));
+            values::format("The ticket of %@ is all that its signature holds: it stays in place.", name));
     }
     if (retrieval::holdsTrailersWithoutTicket(*fresh))
-        return end(
-            kExitOK, Cause::worked,
-            foundation::format("The ticket of %@ has been removed. Trailers of other types stay: pinwell "
-                               "would write another ticket over its first bytes.",
-                               name));
-    return end(kExitOK, Cause::worked, foundation::format("The ticket of %@ has been removed.", name));
+        return end(kExitOK, Cause::worked,
+                   values::format("The ticket of %@ has been removed. Trailers of other types stay: pinwell "
+                                  "would write another ticket over its first bytes.",
+                                  name));
+    return end(kExitOK, Cause::worked, values::format("The ticket of %@ has been removed.", name));
 }
 
 }  // namespace

@@ -5,9 +5,9 @@
 #include <set>
 #include <utility>
 
+#include "base/text.h"
 #include "companion/process.h"
 #include "companion/streams.h"
-#include "foundation/format.h"
 #include "https/session.h"
 #include "retrieval/ticket_request.h"
 #include "src/PWHashedFile/PWHashedFile.h"
@@ -15,6 +15,7 @@
 #include "ticket/command_parts.h"
 #include "ticket/commands.h"
 #include "ticket/ticket_files.h"
+#include "values/format.h"
 
 namespace pinwell::ticket_files {
 namespace {
@@ -70,7 +71,7 @@ class Requesting {
     void requestAll(companion::PathList& list) {
         retrieval::RequestOptions options{*retrieval::serviceURLOf(*settings_.url), settings_.retry,
                                           deadlineOf(settings_)};
-        foundation::FileDescriptor signals = companion::takeEndingSignals();
+        base::FileDescriptor signals = companion::takeEndingSignals();
         retrieval::Cancellation cancellation;
         const companion::SignalWatch watch(std::move(signals), [&](int number) {
             signal_ = number;
@@ -119,7 +120,7 @@ class Requesting {
         const URL url = *artefact.file->fileURL();
         retrieval::TicketWish wish;
         wish.hashes = listableHashes({artefact.algorithm, artefact.hash}, url, platform_.codeSigning);
-        wish.label = settings_.label.value_or(foundation::escapeForTerminal(url.lastPathComponent()));
+        wish.label = settings_.label.value_or(base::escapeForTerminal(url.lastPathComponent()));
         wish.reinstates = settings_.reinstates;
         wish.comment = settings_.comment.value_or("");
         return wish;
@@ -132,7 +133,7 @@ class Requesting {
         report.action = requested.action;
         report.event = requested.event;
         report.messages.push_back(
-            foundation::format("The record service has %@ it: event %@.", requested.action, requested.event));
+            values::format("The record service has %@ it: event %@.", requested.action, requested.event));
         directory_->keep(ticket, report);
     }
 

@@ -11,26 +11,27 @@
 #include <ctime>
 #include <nlohmann/json.hpp>
 
+#include "base/file_io.h"
+#include "base/text.h"
 #include "codesign/code_directory.h"
-#include "foundation/file_io.h"
-#include "foundation/format.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
 #include "src/PWHashedFile/PWHashedFile.h"
+#include "values/format.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::ticket_files {
 
-using foundation::Error;
-using foundation::FileDescriptor;
-using foundation::Result;
-using foundation::Value;
+using base::Error;
+using base::FileDescriptor;
+using base::Result;
 using retrieval::Cause;
+using values::Value;
 
 namespace {
 
 constexpr mode_t kFileMode = 0666;  // without the bits of the user's mask
 
-bool writeAll(const FileDescriptor& file, foundation::ByteView bytes) {
+bool writeAll(const FileDescriptor& file, base::ByteView bytes) {
     while (!bytes.empty()) {
         const ssize_t count = ::write(file.get(), bytes.data(), bytes.size());
         if (count < 0 && errno == EINTR) continue;
@@ -50,7 +51,7 @@ bool flushFolderOf(const std::string& path) {
 
 }  // namespace
 
-Result<void> writeNewFile(foundation::ByteView contents, const std::string& path) {
+Result<void> writeNewFile(base::ByteView contents, const std::string& path) {
     const FileDescriptor file(
         ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kFileMode));
     if (!file) return Error::posix(errno, path);
@@ -60,7 +61,7 @@ Result<void> writeNewFile(foundation::ByteView contents, const std::string& path
     return error;
 }
 
-Result<void> replaceFile(foundation::ByteView contents, const std::string& path) {
+Result<void> replaceFile(base::ByteView contents, const std::string& path) {
     std::string temporary = path + ".XXXXXX";
     const FileDescriptor file(::mkostemp(temporary.data(), O_CLOEXEC));
     if (!file) return Error::posix(errno, path);
@@ -85,17 +86,17 @@ std::string fileNameOfRecord(const std::string& recordName) {
 namespace {
 
 Error notAnIndex(const std::string& path) {
-    return {foundation::kDataErrorDomain, foundation::kMalformedDocument,
+    return {base::kDataErrorDomain, base::kMalformedDocument,
             path + " is not an index of tickets that this version can read."};
 }
 
 std::string textOf(const Value& value) {
-    if (value.string() == nullptr) throw foundation::ValueTypeError("a text was expected");
+    if (value.string() == nullptr) throw values::ValueTypeError("a text was expected");
     return *value.string();
 }
 
 bool truthOf(const Value& value) {
-    if (value.boolean() == nullptr) throw foundation::ValueTypeError("true or false was expected");
+    if (value.boolean() == nullptr) throw values::ValueTypeError("true or false was expected");
     return *value.boolean();
 }
 
@@ -103,12 +104,12 @@ bool truthOf(const Value& value) {
 
 Result<Index> Index::read(const std::string& directory) {
     const std::string path = directory + "/" + kIndexName;
-    const auto contents = foundation::readSmallFile(path, foundation::kMaximumJSONSize);
+    const auto contents = base::readSmallFile(path, values::kMaximumJSONSize);
     if (!contents) {
         if (contents.error().code() == ENOENT) return Index();
         return contents.error();
     }
-    const auto document = foundation::parseJSON(*contents);
+    const auto document = values::parseJSON(*contents);
     if (!document) return notAnIndex(path);
     Index index;
     try {
@@ -118,7 +119,7 @@ Result<Index> Index::read(const std::string& directory) {
         for (const Value& one : *tickets)
             index.set(textOf(one["recordName"]), {textOf(one["file"]), textOf(one["sha256"]),
                                                   textOf(one["fetched"]), truthOf(one["revoked"])});
-    } catch (const foundation::ValueTypeError&) {
+    } catch (const values::ValueTypeError&) {
         return notAnIndex(path);
     }
     return index;
@@ -133,7 +134,7 @@ Result<void> Index::write(const std::string& directory) const {
                            {"fetched", entry.fetched},
                            {"revoked", entry.revoked}});
     const nlohmann::ordered_json document = {{"version", kIndexVersion}, {"tickets", std::move(tickets)}};
-    return replaceFile(foundation::asBytes(document.dump() + "\n"), directory + "/" + kIndexName);
+    return replaceFile(base::asBytes(document.dump() + "\n"), directory + "/" + kIndexName);
 }
 
 namespace {
@@ -165,17 +166,17 @@ void TicketDirectory::keep(const retrieval::FetchedTicket& ticket, retrieval::Re
     const std::string file = fileNameOfRecord(ticket.recordName);
     report.file = file;
     if (const auto written = replaceFile(ticket.ticket, path_ + "/" + file); !written) {
-        report.messages.push_back(foundation::format("Could not write the ticket to %@. %@", file,
-                                                     written.error().localizedFailureReason()));
+        report.messages.push_back(values::format("Could not write the ticket to %@. %@", file,
+                                                 written.error().localizedFailureReason()));
         report.exitStatus = retrieval::worseStatus(report.exitStatus, kExitCannotCreate);
         if (report.exitStatus == kExitCannotCreate) report.cause = Cause::notWritable;
         return;
     }
     if (ticket.cause == Cause::worked)
-        report.messages.push_back(foundation::format("The ticket has been written to %@.", file));
+        report.messages.push_back(values::format("The ticket has been written to %@.", file));
     index_.set(ticket.recordName,
-               {file, foundation::toHex(codesign::digest(codesign::DigestType::sha256, ticket.ticket)),
-                timeText(), ticket.cause == Cause::revoked});
+               {file, base::toHex(codesign::digest(codesign::DigestType::sha256, ticket.ticket)), timeText(),
+                ticket.cause == Cause::revoked});
 }
 
 Result<void> TicketDirectory::close() const {

@@ -12,8 +12,8 @@
 #include <string>
 #include <utility>
 
-#include "foundation/bytes.h"
-#include "foundation/error.h"
+#include "base/bytes.h"
+#include "base/error.h"
 #include "retrieval/report.h"
 #include "retrieval/ticket_fetch.h"
 
@@ -21,10 +21,10 @@ namespace pinwell::ticket_files {
 
 /// Makes a new file, and returns after it is on stable storage. An existing file stays unchanged (EEXIST).
 /// After a failed write there is no file.
-foundation::Result<void> writeNewFile(foundation::ByteView contents, const std::string& path);
+base::Result<void> writeNewFile(base::ByteView contents, const std::string& path);
 
 /// The same, but replaces an existing file, completely or not at all.
-foundation::Result<void> replaceFile(foundation::ByteView contents, const std::string& path);
+base::Result<void> replaceFile(base::ByteView contents, const std::string& path);
 
 /// The name of the file with a record's ticket: "2-2-0a1b....ticket".
 std::string fileNameOfRecord(const std::string& recordName);
@@ -43,13 +43,13 @@ class Index {
   public:
     /// The directory's index; empty if there is none. Returns an error if the file is no index, or one of a
     /// later version: it must not be overwritten then.
-    static foundation::Result<Index> read(const std::string& directory);
+    static base::Result<Index> read(const std::string& directory);
 
     void set(const std::string& recordName, IndexEntry entry) {
         entries_.insert_or_assign(recordName, std::move(entry));
     }
 
-    foundation::Result<void> write(const std::string& directory) const;
+    base::Result<void> write(const std::string& directory) const;
 
   private:
     std::map<std::string, IndexEntry> entries_;
@@ -59,14 +59,14 @@ class Index {
 class TicketDirectory {
   public:
     /// Makes a missing directory, and reads its index. The error names the failed action.
-    static foundation::Result<TicketDirectory> open(const std::string& path);
+    static base::Result<TicketDirectory> open(const std::string& path);
 
     /// Writes the ticket to the file of its record, and replaces an earlier one. Adds the result to the
     /// report: the file, a message, and the failure if it could not be written.
     void keep(const retrieval::FetchedTicket& ticket, retrieval::Report& report);
 
     /// Writes the index. The error names the failed action.
-    foundation::Result<void> close() const;
+    base::Result<void> close() const;
 
   private:
     TicketDirectory(std::string path, Index index) : path_(std::move(path)), index_(std::move(index)) {}

@@ -4,10 +4,10 @@
 #include <charconv>
 #include <utility>
 
+#include "base/byte_io.h"
 #include "codesign/code_error.h"
-#include "foundation/byte_reader.h"
-#include "foundation/format.h"
-#include "foundation/xml_parser.h"
+#include "values/format.h"
+#include "values/xml_parser.h"
 #include "xar/header.h"
 #include "xar/inflater.h"
 #include "xar/table_of_contents.h"
@@ -17,7 +17,7 @@ namespace pinwell::verify {
 using codesign::ByteSource;
 using codesign::FileRange;
 using codesign::refuse;
-using foundation::format;
+using values::format;
 
 namespace {
 
@@ -82,7 +82,7 @@ struct Described {
 void requireHeaderForm(ByteView start, const xar::Header& header) {
     constexpr std::size_t kVersionOffset = 6;
     constexpr std::uint16_t kVersion = 1;
-    foundation::ByteReader reader(start);
+    base::ByteReader reader(start);
     reader.seek(kVersionOffset, "version");
     if (const std::uint16_t version = reader.be16("version"); version != kVersion)
         refuse(format("the archive's header has the version %u", version));
@@ -103,12 +103,12 @@ std::string ArchiveTable::pathOf(std::size_t file) const {
     return path;
 }
 
-class ArchiveTableReader::Document final : public foundation::XMLEvents {
+class ArchiveTableReader::Document final : public values::XMLEvents {
   public:
     void feed(ByteView bytes) {
         try {
             parser_.feed(bytes);
-        } catch (const foundation::MalformedXML& error) {
+        } catch (const values::MalformedXML& error) {
             refuse(std::string("the table of contents is no XML: ") + error.what());
         }
     }
@@ -116,14 +116,14 @@ class ArchiveTableReader::Document final : public foundation::XMLEvents {
     ArchiveTable finish() {
         try {
             parser_.finish();
-        } catch (const foundation::MalformedXML& error) {
+        } catch (const values::MalformedXML& error) {
             refuse(std::string("the table of contents is no XML: ") + error.what());
         }
         if (!hasTable_) refuse("the archive has no table of contents");
         return std::move(table_);
     }
 
-    void begin(std::string_view name, const foundation::XMLAttributes& attributes) override {
+    void begin(std::string_view name, const values::XMLAttributes& attributes) override {
         const Place around = open_.empty() ? Place::outside : open_.back();
         if (open_.size() == kMaximumTableDepth) refuse("the table of contents is too deep");
         open_.push_back(placeOf(withoutPrefix(name), around));
@@ -285,7 +285,7 @@ class ArchiveTableReader::Document final : public foundation::XMLEvents {
     std::string style_;
     std::string text_;
     bool hasTable_ = false;
-    foundation::XMLParser parser_{*this, foundation::XMLParser::DocumentType::refused};
+    values::XMLParser parser_{*this, values::XMLParser::DocumentType::refused};
 };
 
 ArchiveTableReader::ArchiveTableReader() : document_(std::make_unique<Document>()) {}
@@ -328,13 +328,13 @@ Archive readArchive(const ByteSource& source, std::uint64_t end) {
         at += piece.size();
     }
     if (!inflater.complete()) refuse("the table of contents cannot be decompressed");
-    foundation::ByteReader stated(start);
+    base::ByteReader stated(start);
     stated.seek(16, "uncompressed length");
     if (stated.be64("uncompressed length") != length)
         refuse("the header states another length of the table of contents");
     archive.table = reader.finish();
     archive.algorithm = header->digest;
-    if (hasher) archive.computed = foundation::toData(hasher->finish());
+    if (hasher) archive.computed = base::toData(hasher->finish());
     return archive;
 }
 

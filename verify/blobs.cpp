@@ -4,13 +4,13 @@
 #include "codesign/static_code.h"
 #include "codesign/superblob.h"
 #include "formats/superblob.h"
-#include "foundation/format.h"
+#include "values/format.h"
 #include "verify/check.h"
 #include "verify/signature_parts.h"
 
 namespace pinwell::verify {
 
-using foundation::format;
+using values::format;
 
 namespace {
 

@@ -7,23 +7,22 @@
 #include <optional>
 #include <string>
 
+#include "base/byte_io.h"
 #include "codesign/code_error.h"
-#include "foundation/byte_reader.h"
-#include "foundation/byte_writer.h"
-#include "foundation/format.h"
-#include "foundation/property_list.h"
-#include "foundation/value.h"
+#include "values/format.h"
+#include "values/property_list.h"
+#include "values/value.h"
 #include "verify/check.h"
 #include "verify/page_digest.h"
 #include "xar/inflater.h"
 
 namespace pinwell::verify {
 
+using base::ByteReader;
 using codesign::ByteSource;
 using codesign::FileRange;
-using foundation::ByteReader;
-using foundation::format;
-using foundation::Value;
+using values::format;
+using values::Value;
 
 namespace {
 
@@ -119,7 +118,7 @@ class TableReader {
         table.place = std::move(place);
         try {
             readInto(bytes, table);
-        } catch (const foundation::ShortRead& error) {
+        } catch (const base::ShortRead& error) {
             table.fault = error.what();
         }
         return table;
@@ -230,9 +229,9 @@ class SecondOpinion {
     void run() {
         const std::optional<Data> document = propertyList();
         if (!document) return skip("it has no list of its blocks");
-        const foundation::Result<Value> list = foundation::parsePropertyList(*document);
+        const base::Result<Value> list = values::parsePropertyList(*document);
         if (!list) return skip("its list of blocks cannot be read");
-        const foundation::Array* const tables = (*list)["resource-fork"]["blkx"].array();
+        const values::Array* const tables = (*list)["resource-fork"]["blkx"].array();
         if (tables == nullptr || tables->empty()) return skip("its list names no blocks");
 
         TableReader reader(dataFork_, limit_);
@@ -257,7 +256,7 @@ class SecondOpinion {
     std::optional<Data> propertyList() const {
         const std::uint64_t offset = trailer_.xmlOffset();
         const std::uint64_t length = trailer_.xmlLength();
-        if (length == 0 || length > foundation::kMaximumPropertyListSize || offset > limit_ ||
+        if (length == 0 || length > values::kMaximumPropertyListSize || offset > limit_ ||
             length > limit_ - offset)
             return std::nullopt;
         return source_.read(offset, static_cast<std::size_t>(length));
@@ -279,7 +278,7 @@ class SecondOpinion {
     }
 
     void checkMaster(const std::vector<Table>& tables) {
-        foundation::ByteWriter values;
+        base::ByteWriter values;
         for (const Table& table : tables) {
             if (!table.stated) return;
             values.be32(*table.stated);

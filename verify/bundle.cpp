@@ -3,20 +3,20 @@
 #include <algorithm>
 #include <utility>
 
+#include "base/byte_io.h"
+#include "base/bytes.h"
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
-#include "foundation/bundle.h"
-#include "foundation/byte_reader.h"
-#include "foundation/bytes.h"
-#include "foundation/format.h"
-#include "foundation/property_list.h"
+#include "values/bundle.h"
+#include "values/format.h"
+#include "values/property_list.h"
 #include "verify/image_layout.h"
 #include "verify/page_hashes.h"
 
 namespace pinwell::verify {
 
 using codesign::CodeError;
-using foundation::format;
+using values::format;
 
 namespace {
 
@@ -44,7 +44,7 @@ std::string propertyListOf(const BundleLayout& layout) {
 BundleLayout layoutOfBundle(const std::string& path) {
     BundleLayout layout;
     layout.bundle = OpenDirectory::atPath(path);
-    const std::optional<std::string> found = foundation::mainExecutableOfBundle(path);
+    const std::optional<std::string> found = values::mainExecutableOfBundle(path);
     if (!found) throw CodeError(codesign::kStaticCodeNotFound, "the directory has no main executable");
     std::string executable = found->substr(path.size());
     executable.erase(0, executable.find_first_not_of('/'));
@@ -72,7 +72,7 @@ BundleLayout layoutOfBundle(const std::string& path) {
 }
 
 /// A property list, or a seal. Longer ones are refused.
-constexpr std::uint64_t kMaximumComponent = foundation::kMaximumPropertyListSize;
+constexpr std::uint64_t kMaximumComponent = values::kMaximumPropertyListSize;
 
 /// The result of `read`; `nullopt` if the file does not exist.
 template <class Read>
@@ -139,7 +139,7 @@ void checkExecuteBit(const OpenFile& file, const std::string& place, Section& se
         if (codesign::isExecutableImage(file) && !isProgram(file)) return;
     } catch (const CodeError&) {
         // The image is damaged; its own checks report that.
-    } catch (const foundation::ShortRead&) {
+    } catch (const base::ShortRead&) {
     }
     section.fail(kBundleStructure, place, "a program that may be executed", "a file without an execute bit");
 }

@@ -19,7 +19,7 @@
 // Outside of that root a bundle has nothing, except the links of a framework that name its current version.
 // Nested code is verified like a bundle or an image, with its own section.
 //
-// The places of a bundle's parts. foundation::mainExecutableOfBundle finds the main executable, as for the
+// The places of a bundle's parts. values::mainExecutableOfBundle finds the main executable, as for the
 // ticketed hash; the other places follow from it.
 //
 // | Layout      | Root of the seal    | Property list                      | Executable               |

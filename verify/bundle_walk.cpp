@@ -3,17 +3,18 @@
 #include <array>
 #include <utility>
 
+#include "base/byte_io.h"
+#include "base/text.h"
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
-#include "foundation/byte_reader.h"
-#include "foundation/format.h"
+#include "values/format.h"
 #include "verify/bundle.h"
 #include "verify/requirement.h"
 
 namespace pinwell::verify {
 
 using codesign::CodeError;
-using foundation::format;
+using values::format;
 
 namespace {
 
@@ -270,7 +271,7 @@ void BundleWalk::visitNested(const DirectoryRef& directory, const Entry& entry, 
         } else {
             nested.fail(kNestedCode, place, "signed code", error.what());
         }
-    } catch (const foundation::ShortRead& error) {
+    } catch (const base::ShortRead& error) {
         nested.fail(kNestedCode, place, "signed code", error.what());
     }
     bindNested(std::move(code), sealed, nested);
@@ -279,7 +280,7 @@ void BundleWalk::visitNested(const DirectoryRef& directory, const Entry& entry, 
 
 // Checks that nested code is the code that the seal names.
 void BundleWalk::bindNested(VerifiedCode nested, const SealedEntry& sealed, Section& section) {
-    std::string wanted = sealed.digest.empty() ? std::string() : "cdhash " + foundation::toHex(sealed.digest);
+    std::string wanted = sealed.digest.empty() ? std::string() : "cdhash " + base::toHex(sealed.digest);
     if (!sealed.text.empty()) wanted += (wanted.empty() ? "" : ", ") + sealed.text;
     std::string found;
     bool isNamed = false;
@@ -295,8 +296,8 @@ void BundleWalk::bindNested(VerifiedCode nested, const SealedEntry& sealed, Sect
         isNamed = isNamed || identity.isSealed;
         if (!identity.isSealed && satisfied == Satisfied::no)
             section.fail(kNestedCode, identity.place, wanted,
-                         "cdhash " + foundation::toHex(identity.codeHashes.front()));
-        found += (found.empty() ? "cdhash " : ", ") + foundation::toHex(identity.codeHashes.front());
+                         "cdhash " + base::toHex(identity.codeHashes.front()));
+        found += (found.empty() ? "cdhash " : ", ") + base::toHex(identity.codeHashes.front());
     }
     if (isNamed) {
         section.pass(kNestedCode, section.place, wanted, found);

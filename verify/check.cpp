@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <utility>
 
-#include "foundation/format.h"
+#include "values/format.h"
 
 namespace pinwell::verify {
 
@@ -72,7 +72,7 @@ FailureList::~FailureList() {
                   section_.place,
                   worst_,
                   {},
-                  foundation::format("%zu more of the same kind", count_ - kMaximumFailuresKept)});
+                  values::format("%zu more of the same kind", count_ - kMaximumFailuresKept)});
 }
 
 void FailureList::add(Outcome outcome, std::string place, std::string expected, std::string found) {

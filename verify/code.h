@@ -7,8 +7,8 @@
 #include <string>
 #include <vector>
 
+#include "base/bytes.h"
 #include "codesign/byte_source.h"
-#include "foundation/bytes.h"
 #include "verify/check.h"
 #include "verify/signature_parts.h"
 #include "verify/workers.h"

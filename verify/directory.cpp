@@ -11,13 +11,13 @@
 #include <climits>
 #include <cstring>
 
+#include "base/handle.h"
 #include "codesign/code_error.h"
-#include "foundation/handle.h"
 
 namespace pinwell::verify {
 
+using base::FileDescriptor;
 using codesign::CodeError;
-using foundation::FileDescriptor;
 
 namespace {
 
@@ -49,7 +49,7 @@ EntryKind kindFrom(mode_t mode) {
     }
 }
 
-using Listing = foundation::Handle<DIR, closedir>;
+using Listing = base::Handle<DIR, closedir>;
 
 // Splits off the last name; the rest may be empty.
 std::pair<std::string_view, std::string_view> splitLast(std::string_view path) {
@@ -80,7 +80,7 @@ bool staysBelow(const std::vector<std::string>& pending) {
 
 }  // namespace
 
-OpenFile::OpenFile(foundation::RegularFile file)
+OpenFile::OpenFile(base::RegularFile file)
     : file_(std::move(file.descriptor)),
       size_(static_cast<std::uint64_t>(file.status.st_size)),
       hasExecuteBit_((file.status.st_mode & (S_IXUSR | S_IXGRP | S_IXOTH)) != 0) {}
@@ -157,7 +157,7 @@ DirectoryRef OpenDirectory::directory(const std::string& name) const {
 
 std::unique_ptr<OpenFile> OpenDirectory::file(const std::string& name) const {
     requireName(name);
-    auto opened = foundation::openRegularFile(directory_.get(), name, O_RDONLY | O_NOFOLLOW, name);
+    auto opened = base::openRegularFile(directory_.get(), name, O_RDONLY | O_NOFOLLOW, name);
     if (opened) return std::make_unique<OpenFile>(*std::move(opened));
     const auto reason = static_cast<int>(opened.error().code());
     if (reason == EISDIR || reason == EINVAL)

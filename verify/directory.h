@@ -11,8 +11,9 @@
 #include <string_view>
 #include <vector>
 
+#include "base/file_io.h"
+#include "base/handle.h"
 #include "codesign/byte_source.h"
-#include "foundation/file_io.h"
 
 namespace pinwell::verify {
 
@@ -26,7 +27,7 @@ struct Entry {
 /// The bytes of an open regular file, with the size it had when it was opened.
 class OpenFile final : public codesign::ByteSource {
   public:
-    explicit OpenFile(foundation::RegularFile file);
+    explicit OpenFile(base::RegularFile file);
 
     std::uint64_t size() const override { return size_; }
 
@@ -38,7 +39,7 @@ class OpenFile final : public codesign::ByteSource {
   private:
     std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const override;
 
-    foundation::FileDescriptor file_;
+    base::FileDescriptor file_;
     std::uint64_t size_;
     bool hasExecuteBit_;
 };
@@ -66,9 +67,9 @@ class OpenDirectory {
     DirectoryRef directoryAt(std::string_view relativePath) const;
 
   private:
-    explicit OpenDirectory(foundation::FileDescriptor directory) : directory_(std::move(directory)) {}
+    explicit OpenDirectory(base::FileDescriptor directory) : directory_(std::move(directory)) {}
 
-    foundation::FileDescriptor directory_;
+    base::FileDescriptor directory_;
 };
 
 /// Whether the link at `path` below `root` leads to `root` or below it, also through other links. A target

@@ -2,12 +2,12 @@
 
 #include <algorithm>
 
+#include "base/bytes.h"
 #include "codesign/code_error.h"
 #include "codesign/static_code.h"
 #include "codesign/superblob.h"
 #include "formats/disk_image.h"
-#include "foundation/bytes.h"
-#include "foundation/format.h"
+#include "values/format.h"
 #include "verify/block_table.h"
 #include "verify/check.h"
 #include "verify/page_hashes.h"
@@ -18,7 +18,7 @@ using codesign::ByteSource;
 using codesign::CodeError;
 using codesign::DiskImageTrailer;
 using codesign::FileRange;
-using foundation::format;
+using values::format;
 
 namespace {
 
@@ -55,7 +55,7 @@ bool wasDiskImage(const ByteSource& source) {
     constexpr std::uint64_t kTailSize = 8192;
     const auto length = static_cast<std::size_t>(std::min(kTailSize, source.size()));
     const Data tail = source.read(source.size() - length, length);
-    const ByteView magic = foundation::asBytes("koly");
+    const ByteView magic = base::asBytes("koly");
     if (std::search(tail.begin(), tail.end(), magic.begin(), magic.end()) != tail.end()) return true;
     if (tail.size() < kUDIFHeaderSize) return false;
     UDIFFileHeader header;
@@ -93,7 +93,7 @@ VerifiedCode verifyDiskImage(const ByteSource& source, Workers& workers, Section
         } else {
             section.fail(kSignature, kImagePlace, "a well-formed signature", error.what());
         }
-    } catch (const foundation::ShortRead& error) {
+    } catch (const base::ShortRead& error) {
         section.fail(kSignature, kImagePlace, "a well-formed signature", error.what());
     }
     return {.isSigned = true, .identities = {}};

@@ -3,13 +3,13 @@
 #include <algorithm>
 #include <utility>
 
+#include "base/byte_io.h"
+#include "base/bytes.h"
 #include "codesign/cms_signature.h"
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
 #include "codesign/superblob.h"
-#include "foundation/byte_reader.h"
-#include "foundation/bytes.h"
-#include "foundation/format.h"
+#include "values/format.h"
 #include "verify/check.h"
 #include "verify/image_layout.h"
 #include "verify/page_digest.h"
@@ -21,7 +21,7 @@ using codesign::ByteSource;
 using codesign::CodeError;
 using codesign::FileRange;
 using codesign::ImageSlice;
-using foundation::format;
+using values::format;
 
 namespace {
 
@@ -87,7 +87,7 @@ class ImageCheck {
             return {true, identityOf(*parts, at)};
         } catch (const CodeError& error) {
             reportBroken(at, error);
-        } catch (const foundation::ShortRead& error) {
+        } catch (const base::ShortRead& error) {
             section_.fail(kSignature, at, "a well-formed signature", error.what());
         }
         return {true, std::nullopt};
@@ -162,7 +162,7 @@ VerifiedCode verifyExecutable(const ByteSource& source, const OutsideComponents&
         } else {
             section.fail(kImageStructure, place, "a well-formed executable image", error.what());
         }
-    } catch (const foundation::ShortRead& error) {
+    } catch (const base::ShortRead& error) {
         section.fail(kImageStructure, place, "a well-formed executable image", error.what());
     }
     return {.isSigned = true, .identities = {}};

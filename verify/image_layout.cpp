@@ -3,18 +3,18 @@
 #include <algorithm>
 #include <limits>
 
+#include "base/byte_io.h"
+#include "base/bytes.h"
 #include "codesign/code_error.h"
-#include "foundation/byte_reader.h"
-#include "foundation/bytes.h"
-#include "foundation/format.h"
+#include "values/format.h"
 #include "verify/check.h"
 #include "verify/page_digest.h"
 
 namespace pinwell::verify {
 
+using base::ByteReader;
 using codesign::ImageSlice;
-using foundation::ByteReader;
-using foundation::format;
+using values::format;
 
 namespace {
 
@@ -48,7 +48,7 @@ class ImageReader {
     }
     void skip(std::uint64_t length, const char* what) { reader_.skip(length, what); }
     std::string name(const char* what) {
-        const std::string text = foundation::toString(reader_.bytes(kNameSize, what));
+        const std::string text = base::toString(reader_.bytes(kNameSize, what));
         return text.substr(0, text.find('\0'));
     }
     ImageReader take(std::uint64_t length, const char* what) {

@@ -31,7 +31,7 @@ struct ImageLayout {
     std::optional<FileRange> propertyList;  // section __info_plist of segment __TEXT
 };
 
-/// Throws codesign::CodeError or foundation::ShortRead.
+/// Throws codesign::CodeError or base::ShortRead.
 ImageLayout readImageLayout(const ByteSource& source, const codesign::ImageSlice& slice);
 
 /// Checks that a universal image's list of slices agrees with the slices, that its gaps are zero, and that

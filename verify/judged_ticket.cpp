@@ -2,15 +2,16 @@
 
 #include <algorithm>
 
+#include "base/text.h"
 #include "formats/explain_ticket.h"
 #include "formats/satchel.h"
 #include "formats/tm_ticket.h"
-#include "foundation/format.h"
+#include "values/format.h"
 #include "verify/check.h"
 
 namespace pinwell::verify {
 
-using foundation::format;
+using values::format;
 
 JudgedTicket::JudgedTicket(ByteView bytes, trust::TrustService& trust) {
     tm_ticket* decoded = nullptr;
@@ -27,12 +28,12 @@ JudgedTicket::JudgedTicket(ByteView bytes, trust::TrustService& trust) {
         tm_cdhash entry;
         if (tm_ticket_copy_cdhash(ticket.get(), i, &entry) != 0) continue;
         entries_.insert(
-            foundation::toString(ByteView(entry.hash).first(tm_cdhash_algorithm_get_size(entry.algorithm))));
+            base::toString(ByteView(entry.hash).first(tm_cdhash_algorithm_get_size(entry.algorithm))));
     }
 }
 
 bool JudgedTicket::lists(ByteView codeHash) const {
-    return entries_.contains(foundation::toString(codeHash));
+    return entries_.contains(base::toString(codeHash));
 }
 
 void checkMissingTicket(const std::optional<TicketPlaceFault>& fault, const std::string& place,
@@ -67,7 +68,7 @@ bool checkTicket(const JudgedTicket& ticket, const std::optional<Data>& codeHash
                      "the artefact has no hash that a ticket could list");
         return false;
     }
-    const std::string hash = foundation::toHex(*codeHash);
+    const std::string hash = base::toHex(*codeHash);
     if (!ticket.lists(*codeHash)) {
         section.fail(kTicketLists, place, hash, format("%zu other hashes", ticket.entryCount()));
         return false;
@@ -79,7 +80,7 @@ bool checkTicket(const JudgedTicket& ticket, const std::optional<Data>& codeHash
 bool checkListing(const VerifiedCode& code, const std::function<bool(ByteView)>& lists, Section& section) {
     bool isVouchedFor = true;
     for (const CodeIdentity& identity : code.identities) {
-        const std::string hash = foundation::toHex(identity.codeHashes.front());
+        const std::string hash = base::toHex(identity.codeHashes.front());
         if (std::any_of(identity.codeHashes.begin(), identity.codeHashes.end(), lists)) {
             section.pass(kCodeListed, identity.place, hash);
         } else if (identity.isSealed) {
@@ -100,8 +101,8 @@ bool checkOneArtefact(const VerifiedCode& code, const std::optional<Data>& codeH
             return !identity.isNested && identity.codeHashes.front() == *codeHash;
         });
     if (isThere) return true;
-    section.fail(kArtefact, {}, foundation::toHex(*codeHash),
-                 foundation::toHex(code.identities.front().codeHashes.front()));
+    section.fail(kArtefact, {}, base::toHex(*codeHash),
+                 base::toHex(code.identities.front().codeHashes.front()));
     return false;
 }
 

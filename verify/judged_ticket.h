@@ -7,15 +7,15 @@
 #include <string>
 #include <unordered_set>
 
+#include "base/bytes.h"
 #include "formats/explain_ticket.h"
-#include "foundation/bytes.h"
 #include "trust/trust.h"
 #include "verify/check.h"
 #include "verify/code.h"
 
 namespace pinwell::verify {
 
-using foundation::ByteView;
+using base::ByteView;
 
 /// The statements of a genuine ticket.
 class JudgedTicket {

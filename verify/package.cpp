@@ -7,11 +7,12 @@
 #include <string_view>
 #include <utility>
 
+#include "base/byte_io.h"
+#include "base/bytes.h"
+#include "base/text.h"
 #include "codesign/code_error.h"
 #include "formats/package_trailers.h"
-#include "foundation/byte_reader.h"
-#include "foundation/bytes.h"
-#include "foundation/format.h"
+#include "values/format.h"
 #include "verify/archive_table.h"
 #include "verify/check.h"
 #include "verify/signature_parts.h"
@@ -23,7 +24,7 @@ using codesign::ByteSource;
 using codesign::CodeError;
 using codesign::FileRange;
 using codesign::refuse;
-using foundation::format;
+using values::format;
 
 namespace {
 
@@ -135,7 +136,7 @@ bool beginsAsArchive(const ByteSource& source) {
     constexpr std::uint16_t kVersion = 1;
     if (source.size() < xar::kFixedHeaderSize) return false;
     const Data start = source.read(0, xar::kFixedHeaderSize);
-    foundation::ByteReader reader(start);
+    base::ByteReader reader(start);
     if (reader.be32("magic") == kMagic) return true;
     return reader.be16("header size") == xar::kFixedHeaderSize && reader.be16("version") == kVersion;
 }
@@ -170,11 +171,11 @@ class PackageCheck {
             return;
         }
         stored_ = source_.read(range->offset, static_cast<std::size_t>(range->length));
-        const std::string stored = foundation::toHex(stored_);
+        const std::string stored = base::toHex(stored_);
         if (stored_ == archive_.computed) {
             section_.pass(kTableChecksum, kPlace, stored);
         } else {
-            section_.fail(kTableChecksum, kPlace, stored, foundation::toHex(archive_.computed));
+            section_.fail(kTableChecksum, kPlace, stored, base::toHex(archive_.computed));
         }
     }
 
@@ -219,7 +220,7 @@ class PackageCheck {
     /// The bytes up to the length that a message states, without the zeros that fill its reserved space.
     static ByteView withoutPadding(ByteView bytes) {
         try {
-            foundation::ByteReader reader(bytes);
+            base::ByteReader reader(bytes);
             reader.skip(1, "tag");
             std::uint64_t length = reader.u8("length");
             constexpr std::uint64_t kLongForm = 0x80;
@@ -237,7 +238,7 @@ class PackageCheck {
             const bool isZeros =
                 std::all_of(rest.begin(), rest.end(), [](std::byte byte) { return byte == std::byte{0}; });
             return isZeros ? bytes.first(end) : bytes;
-        } catch (const foundation::ShortRead&) {
+        } catch (const base::ShortRead&) {
             return bytes;
         }
     }
@@ -248,7 +249,7 @@ class PackageCheck {
     }
 
     static std::string wantedOf(const ArchivedData& data) {
-        return data.checksum.empty() ? "an archived checksum" : foundation::toHex(data.checksum);
+        return data.checksum.empty() ? "an archived checksum" : base::toHex(data.checksum);
     }
 
     struct Fault {
@@ -305,7 +306,7 @@ class PackageCheck {
             const bool isSame =
                 std::equal(found.begin(), found.end(), data.checksum.begin(), data.checksum.end());
             if (isSame) return std::nullopt;
-            return Fault{&data, Outcome::failed, foundation::toHex(found)};
+            return Fault{&data, Outcome::failed, base::toHex(found)};
         } catch (const CodeError& error) {
             return Fault{&data, Outcome::unreadable, error.what()};
         }
@@ -385,7 +386,7 @@ VerifiedCode verifyPackage(const ByteSource& source, Workers& workers, Section& 
         } else {
             section.fail(kArchive, "archive", "a well-formed archive", error.what());
         }
-    } catch (const foundation::ShortRead& error) {
+    } catch (const base::ShortRead& error) {
         section.fail(kArchive, "archive", "a well-formed archive", error.what());
     }
     return {.isSigned = beginsAsArchive(source), .identities = {}};

@@ -5,16 +5,16 @@
 #include <functional>
 #include <span>
 
+#include "base/bytes.h"
 #include "codesign/byte_source.h"
 #include "codesign/code_directory.h"
 #include "codesign/executable_image.h"
 #include "crypto/crypto.h"
-#include "foundation/bytes.h"
 
 namespace pinwell::verify {
 
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteView;
+using base::Data;
 
 using Algorithm = crypto::Digest;
 using codesign::algorithmOf;

@@ -4,9 +4,10 @@
 #include <mutex>
 #include <utility>
 
+#include "base/bytes.h"
+#include "base/text.h"
 #include "codesign/code_error.h"
-#include "foundation/bytes.h"
-#include "foundation/format.h"
+#include "values/format.h"
 #include "verify/check.h"
 #include "verify/page_digest.h"
 
@@ -14,7 +15,7 @@ namespace pinwell::verify {
 
 using codesign::ByteSource;
 using codesign::FileRange;
-using foundation::format;
+using values::format;
 
 namespace {
 
@@ -87,8 +88,8 @@ class PageCheck {
                              format("%@, page %u (bytes %llu to %llu)", directoryPlace(place_, *directory),
                                     difference.page, code_.offset + difference.begin,
                                     code_.offset + difference.begin + difference.length - 1),
-                             foundation::toHex(directory->codeDigest(difference.page)),
-                             foundation::toHex(difference.found));
+                             base::toHex(directory->codeDigest(difference.page)),
+                             base::toHex(difference.found));
             }
             if (failures.count() == 0)
                 section.pass(kPageHashes, directoryPlace(place_, *directory),
@@ -128,7 +129,7 @@ class PageCheck {
             ++uncounted_;
         } else {
             different_.push_back(
-                {&directory, page, begin, length, foundation::toData(found.first(expected.size()))});
+                {&directory, page, begin, length, base::toData(found.first(expected.size()))});
         }
     }
 

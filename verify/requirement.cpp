@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <string>
 
+#include "base/text.h"
+
 namespace pinwell::verify {
 
 namespace {
@@ -150,7 +152,7 @@ class Evaluation {
         std::transform(wanted.begin(), wanted.end(), wanted.begin(),
                        [](char c) { return c >= 'A' && c <= 'F' ? static_cast<char>(c - 'A' + 'a') : c; });
         return std::any_of(code_.codeHashes.begin(), code_.codeHashes.end(),
-                           [&](const Data& hash) { return foundation::toHex(hash) == wanted; });
+                           [&](const Data& hash) { return base::toHex(hash) == wanted; });
     }
 
     // Skips an unsupported condition, up to the next one.

@@ -6,19 +6,20 @@
 #include <cmath>
 #include <utility>
 
+#include "base/text.h"
 #include "codesign/code_error.h"
-#include "foundation/format.h"
-#include "foundation/property_list.h"
-#include "foundation/value.h"
+#include "values/format.h"
+#include "values/property_list.h"
+#include "values/value.h"
 #include "verify/page_digest.h"
 
 namespace pinwell::verify {
 
 using codesign::CodeError;
 using codesign::refuse;
-using foundation::Dictionary;
-using foundation::format;
-using foundation::Value;
+using values::Dictionary;
+using values::format;
+using values::Value;
 
 struct Seal::Rule {
     std::unique_ptr<const RE2> pattern;
@@ -134,7 +135,7 @@ Seal::Seal(Seal&&) noexcept = default;
 Seal& Seal::operator=(Seal&&) noexcept = default;
 
 Seal Seal::parse(ByteView document) {
-    const foundation::Result<Value> list = foundation::parsePropertyList(document);
+    const base::Result<Value> list = values::parsePropertyList(document);
     if (!list) refuse("the seal is no property list: " + list.error().localizedFailureReason());
     if (list->dictionary() == nullptr) refuse("the seal is no dictionary");
     Seal seal;
@@ -205,7 +206,7 @@ void SealedFiles::report(Outcome outcome, const Job& job, std::string found) {
         ++uncounted_;
         return;
     }
-    faults_.push_back({outcome, job.place, foundation::toHex(job.entry->digest), std::move(found)});
+    faults_.push_back({outcome, job.place, base::toHex(job.entry->digest), std::move(found)});
 }
 
 void SealedFiles::hashOne(const Job& job) {
@@ -216,7 +217,7 @@ void SealedFiles::hashOne(const Job& job) {
             digestOf(isSha256 ? Algorithm::sha256 : Algorithm::sha1, *file, {0, file->size()});
         const bool isSame =
             std::equal(found.begin(), found.end(), job.entry->digest.begin(), job.entry->digest.end());
-        if (!isSame) report(Outcome::failed, job, foundation::toHex(found));
+        if (!isSame) report(Outcome::failed, job, base::toHex(found));
     } catch (const CodeError& error) {
         report(error.status() == codesign::kIOError ? Outcome::unreadable : Outcome::failed, job,
                error.what());

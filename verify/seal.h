@@ -35,15 +35,15 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "verify/check.h"
 #include "verify/directory.h"
 #include "verify/workers.h"
 
 namespace pinwell::verify {
 
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteView;
+using base::Data;
 
 /// Every path of a bundle is matched against every rule; a seal has about a dozen.
 inline constexpr std::size_t kMaximumRules = 128;

@@ -3,19 +3,20 @@
 #include <algorithm>
 #include <utility>
 
+#include "base/byte_io.h"
+#include "base/text.h"
 #include "codesign/code_error.h"
 #include "codesign/static_code.h"
 #include "codesign/superblob.h"
-#include "foundation/byte_reader.h"
-#include "foundation/format.h"
+#include "values/format.h"
 #include "verify/check.h"
 
 namespace pinwell::verify {
 
+using base::ByteReader;
 using codesign::CodeDirectory;
 using codesign::refuse;
-using foundation::ByteReader;
-using foundation::format;
+using values::format;
 
 namespace {
 
@@ -178,12 +179,12 @@ void checkSpecialSlots(const SignatureParts& parts, const OutsideComponents& out
             const std::optional<ByteView> bytes = component(slot);
             const std::string where = at + ", " + specialSlotName(slot);
             if (!bytes) {
-                failures.add(Outcome::failed, where, foundation::toHex(*stated), "there is nothing there");
+                failures.add(Outcome::failed, where, base::toHex(*stated), "there is nothing there");
                 continue;
             }
             const Data actual = codesign::digest(directory.content.digestType(), *bytes);
             if (actual != *stated) {
-                failures.add(Outcome::failed, where, foundation::toHex(*stated), foundation::toHex(actual));
+                failures.add(Outcome::failed, where, base::toHex(*stated), base::toHex(actual));
             } else {
                 ++covered;
             }

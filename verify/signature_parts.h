@@ -11,16 +11,16 @@
 #include <string>
 #include <vector>
 
+#include "base/bytes.h"
 #include "codesign/code_directory.h"
-#include "foundation/bytes.h"
 #include "verify/check.h"
 #include "verify/signer_message.h"
 
 namespace pinwell::verify {
 
+using base::ByteView;
+using base::Data;
 using codesign::DigestType;
-using foundation::ByteView;
-using foundation::Data;
 
 /// A code directory, with the fields of its header that codesign does not use.
 struct Directory {
@@ -44,7 +44,7 @@ struct Directory {
 class SignatureParts {
   public:
     /// From the bytes of a superblob, with padding. `nullopt` if it has no code directory. Throws
-    /// codesign::CodeError or foundation::ShortRead if it is not well formed.
+    /// codesign::CodeError or base::ShortRead if it is not well formed.
     static std::optional<SignatureParts> fromSuperBlob(codesign::SharedBytes superblob);
 
     /// From the three files of the separate form.

@@ -14,12 +14,12 @@
 
 namespace pinwell::verify {
 
+using base::asBytes;
+using base::ByteView;
+using base::Data;
 using codesign::MessageCertificate;
 using codesign::refuse;
 using codesign::SignedMessage;
-using foundation::asBytes;
-using foundation::ByteView;
-using foundation::Data;
 using trust::X509Certificate;
 using trust::X509CertificateRef;
 

@@ -17,7 +17,7 @@
 
 #include <cstddef>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::verify {
 
@@ -30,6 +30,6 @@ struct SignerMessage {
 
 /// Throws codesign::CodeError unless `message` is a signer's message over `content` that passes all of the
 /// above.
-SignerMessage requireSignerMessage(foundation::ByteView message, foundation::ByteView content);
+SignerMessage requireSignerMessage(base::ByteView message, base::ByteView content);
 
 }  // namespace pinwell::verify

@@ -3,12 +3,12 @@
 #include <optional>
 #include <utility>
 
+#include "base/byte_io.h"
+#include "base/error.h"
+#include "base/places.h"
 #include "codesign/byte_source.h"
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
-#include "foundation/byte_reader.h"
-#include "foundation/error.h"
-#include "foundation/places.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
@@ -17,14 +17,14 @@ namespace pinwell::verify {
 
 namespace {
 
-std::string reasonOf(const foundation::Error& error) {
+std::string reasonOf(const base::Error& error) {
     const std::string& reason = error.localizedFailureReason();
     return reason.empty() ? error.localizedDescription() : reason;
 }
 
 bool isExecutableImage(const std::string& path) {
     try {
-        return codesign::isExecutableImage(codesign::FileSource(foundation::Places(), path));
+        return codesign::isExecutableImage(codesign::FileSource(base::Places(), path));
     } catch (const codesign::CodeError&) {
         return false;
     }
@@ -48,14 +48,14 @@ VerifiedCode verified(const Subject& subject, Workers& workers, Section& root) {
         case Kind::bundle:
             return verifyBundle(subject.path, workers, root);
         case Kind::executable:
-            return verifyExecutable(codesign::FileSource(foundation::Places(), subject.path), {},
-                                    "executable", workers, root);
+            return verifyExecutable(codesign::FileSource(base::Places(), subject.path), {}, "executable",
+                                    workers, root);
         case Kind::diskImage:
-            return verifyDiskImage(codesign::FileSource(foundation::Places(), subject.path), workers, root);
+            return verifyDiskImage(codesign::FileSource(base::Places(), subject.path), workers, root);
         case Kind::package:
             break;
     }
-    return verifyPackage(codesign::FileSource(foundation::Places(), subject.path), workers, root);
+    return verifyPackage(codesign::FileSource(base::Places(), subject.path), workers, root);
 }
 
 }  // namespace
@@ -74,7 +74,7 @@ std::string_view nameOf(Kind kind) {
     return "package";
 }
 
-OpenedArtefact openArtefact(const foundation::URL& url, const Platform& platform) {
+OpenedArtefact openArtefact(const values::URL& url, const Platform& platform) {
     const auto properties = platform.files.resourceProperties(url);
     if (!properties) return refused("The path cannot be read: " + reasonOf(properties.error()) + ".");
     const auto regular = platform.files.isRegularFile(url);
@@ -102,7 +102,7 @@ Report verifyArtefact(const Subject& subject, Workers& workers) {
         } else {
             report.root.cannotRead(kArtefact, {}, error.what());
         }
-    } catch (const foundation::ShortRead& error) {
+    } catch (const base::ShortRead& error) {
         report.code.isSigned = true;
         report.root.fail(kSignature, {}, "a well-formed signature", error.what());
     }

@@ -15,9 +15,9 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/url.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/platform.h"
+#include "values/url.h"
 #include "verify/check.h"
 #include "verify/code.h"
 #include "verify/workers.h"
@@ -40,7 +40,7 @@ struct OpenedArtefact {
 /// Opens the artefact at `url` like the tool, after checking that it can be read. It has no kind if it is a
 /// file of a directory's kind, or an executable file that is not an executable image. The tool's message
 /// functions must be silent.
-OpenedArtefact openArtefact(const foundation::URL& url, const Platform& platform);
+OpenedArtefact openArtefact(const values::URL& url, const Platform& platform);
 
 struct Subject {
     Kind kind = Kind::bundle;

@@ -2,14 +2,14 @@
 
 #include <limits>
 
+#include "base/byte_io.h"
 #include "codesign/byte_source.h"
 #include "codesign/code_directory.h"
 #include "codesign/superblob.h"
-#include "foundation/byte_writer.h"
 
 namespace pinwell::codesign {
 
-using foundation::ByteWriter;
+using base::ByteWriter;
 
 namespace {
 
@@ -28,7 +28,7 @@ Data digestOfContent(const ByteSource& source, std::uint64_t limit) {
     crypto::Hasher hasher(crypto::Digest::sha256);
     ReadAhead content(source, limit);
     for (ByteView piece = content.next(); !piece.empty(); piece = content.next()) hasher.update(piece);
-    return foundation::toData(hasher.finish());
+    return base::toData(hasher.finish());
 }
 
 }  // namespace

@@ -4,14 +4,14 @@
 #include <string>
 #include <vector>
 
+#include "base/byte_io.h"
 #include "codesign/code_error.h"
-#include "foundation/byte_reader.h"
 
 namespace pinwell::codesign::ber {
 
 namespace {
 
-using foundation::ByteReader;
+using base::ByteReader;
 
 constexpr std::uint8_t kEndOfContents = 0x00;
 constexpr std::uint8_t kLongTagNumber = 0x1F;
@@ -22,7 +22,7 @@ constexpr std::size_t kEndOfContentsSize = 2;
 
 /// Tag, shortest definite length, contents.
 Data withHeader(ByteView tag, ByteView contents) {
-    Data result = foundation::toData(tag);
+    Data result = base::toData(tag);
     std::size_t digits = 0;
     for (std::size_t rest = contents.size(); rest != 0; rest >>= 8U) ++digits;
     if (contents.size() < kLongLength) {
@@ -31,7 +31,7 @@ Data withHeader(ByteView tag, ByteView contents) {
         result.push_back(static_cast<std::byte>(kLongLength + digits));
         while (digits-- > 0) result.push_back(static_cast<std::byte>(contents.size() >> (8U * digits)));
     }
-    foundation::append(result, contents);
+    base::append(result, contents);
     return result;
 }
 
@@ -85,7 +85,7 @@ Header readHeader(ByteView bytes, Work& work, const char* what) {
         if (header.isEndOfContents() && (header.length != 0U || header.size != kEndOfContentsSize))
             malformed(what);
         return header;
-    } catch (const foundation::ShortRead&) {
+    } catch (const base::ShortRead&) {
         malformed(what);
     }
 }
@@ -112,7 +112,7 @@ Data inDer(const Element& element, Work& work, const char* what, unsigned depth)
     if (depth == 0) refuse(std::string(what) + " is nested too deep");
     Data contents;
     for (Reader reader(element.contents, work); !reader.atEnd();)
-        foundation::append(contents, inDer(reader.next(what), work, what, depth - 1));
+        base::append(contents, inDer(reader.next(what), work, what, depth - 1));
     return withHeader(element.wholeTag, contents);
 }
 
@@ -149,7 +149,7 @@ void Reader::finish(const char* what) const {
 }
 
 Data octets(const Element& element, Work& work, const char* what) {
-    if (!element.isConstructed()) return foundation::toData(element.contents);
+    if (!element.isConstructed()) return base::toData(element.contents);
     Data all;
     std::vector<Reader> levels = {Reader(element.contents, work)};
     while (!levels.empty()) {
@@ -159,7 +159,7 @@ Data octets(const Element& element, Work& work, const char* what) {
         }
         const Element piece = levels.back().next(what);
         if (piece.tag == kOctetString) {
-            foundation::append(all, piece.contents);
+            base::append(all, piece.contents);
         } else if (piece.tag == (kOctetString | kConstructed) && levels.size() < kMaximumStringNesting) {
             levels.emplace_back(piece.contents, work);
         } else {

@@ -17,12 +17,12 @@
 #include <cstdint>
 #include <optional>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::codesign::ber {
 
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteView;
+using base::Data;
 
 inline bool isEqual(ByteView a, ByteView b) {
     return std::ranges::equal(a, b);

@@ -32,15 +32,15 @@ namespace {
 /// Read at once: large enough for usual signatures.
 constexpr std::uint64_t kPiece = 1024 * 1024;
 
-foundation::SparseBuffer bufferFor(std::uint64_t length) {
+base::SparseBuffer bufferFor(std::uint64_t length) {
     try {
-        return foundation::SparseBuffer(length);
+        return base::SparseBuffer(length);
     } catch (const std::bad_alloc&) {
         throw CodeError(kIOError, "there is no room to hold the signature");
     }
 }
 
-foundation::FileDescriptor openToRead(const foundation::Places& places, const std::string& path) {
+base::FileDescriptor openToRead(const base::Places& places, const std::string& path) {
     const auto place = places.find(path);
     if (!place) throw CodeError(statusOfLookup(place.error().code()), "cannot open the file");
     auto file = place->open(O_RDONLY | O_NONBLOCK | O_NOCTTY);
@@ -60,7 +60,7 @@ Data ByteSource::read(std::uint64_t offset, std::size_t length) const {
 SharedBytes ByteSource::readShared(std::uint64_t offset, std::uint64_t length) const {
     checkRange(offset, length);
     if (length <= kPiece) return read(offset, static_cast<std::size_t>(length));
-    foundation::SparseBuffer buffer = bufferFor(length);
+    base::SparseBuffer buffer = bufferFor(length);
     std::vector<std::byte> piece(kPiece);
     for (std::uint64_t done = 0; done < length;) {
         done = std::min(std::max(nextData(offset + done), offset + done) - offset, length);
@@ -86,7 +86,7 @@ void ByteSource::readAll(std::uint64_t offset, std::span<std::byte> buffer) cons
     if (readAt(offset, buffer) != buffer.size()) throw CodeError(kIOError, "the file became shorter");
 }
 
-FileSource::FileSource(const foundation::Places& places, const std::string& path)
+FileSource::FileSource(const base::Places& places, const std::string& path)
     : file_(openToRead(places, path)) {
     struct stat status = {};
     if (fstat(file_.get(), &status) != 0) throw CodeError(kIOError, "cannot examine the file");

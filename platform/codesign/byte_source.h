@@ -11,17 +11,16 @@
 #include <string>
 #include <thread>
 
+#include "base/bytes.h"
+#include "base/handle.h"
+#include "base/places.h"
 #include "codesign/code_signing.h"
-#include "foundation/bytes.h"
-#include "foundation/file_io.h"
-#include "foundation/places.h"
-#include "foundation/sparse_bytes.h"
 
 namespace pinwell::codesign {
 
-using foundation::ByteView;
-using foundation::Data;
-using foundation::SharedBytes;
+using base::ByteView;
+using base::Data;
+using base::SharedBytes;
 
 /// The service's status for a file that cannot be found or opened, by the errno value.
 Status statusOfLookup(std::int64_t reason);
@@ -66,7 +65,7 @@ class FileSource final : public ByteSource {
   public:
     /// Never follows a link in the last component and never blocks on a pipe or device. Throws CodeError:
     /// kStaticCodeNotFound if there is no regular file, kIOError if it cannot be opened.
-    FileSource(const foundation::Places& places, const std::string& path);
+    FileSource(const base::Places& places, const std::string& path);
 
     std::uint64_t size() const override { return size_; }
 
@@ -77,7 +76,7 @@ class FileSource final : public ByteSource {
     std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const override;
     std::uint64_t nextData(std::uint64_t offset) const override;
 
-    foundation::FileDescriptor file_;
+    base::FileDescriptor file_;
     std::uint64_t size_ = 0;
 };
 

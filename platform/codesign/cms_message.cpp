@@ -10,11 +10,11 @@
 
 namespace pinwell::codesign {
 
+using base::asBytes;
+using base::ByteView;
 using ber::Element;
 using ber::Reader;
 using ber::Work;
-using foundation::asBytes;
-using foundation::ByteView;
 
 namespace {
 
@@ -54,7 +54,7 @@ std::optional<Data> readKeyIdentifier(const Element& extensions, Work& work) {
         Element value = extension.next(kCertificate);
         if (value.tag != ber::kOctetString) value = extension.expect(ber::kOctetString, kCertificate);
         Reader inner(value.contents, work);
-        return foundation::toData(inner.expect(ber::kOctetString, kCertificate).contents);
+        return base::toData(inner.expect(ber::kOctetString, kCertificate).contents);
     }
     return std::nullopt;
 }
@@ -217,7 +217,7 @@ bool hasAttributeBeside(const Element& attributes, ByteView type, const char* wh
     return false;
 }
 
-using foundation::Date;
+using values::Date;
 
 namespace {
 
@@ -264,7 +264,7 @@ class TimeReader {
 
 Date parseTime(ByteView text) {
     using namespace std::chrono;
-    const std::string characters = foundation::toString(text);
+    const std::string characters = base::toString(text);
     TimeReader reader(characters);
     // Braces: they evaluate the parts in order.
     const year_month_day date{year(static_cast<int>(reader.digits(4))), month(reader.digits(2)),

@@ -25,9 +25,9 @@
 #include <optional>
 #include <vector>
 
+#include "base/bytes.h"
 #include "codesign/ber.h"
-#include "foundation/bytes.h"
-#include "foundation/date.h"
+#include "values/date.h"
 
 namespace pinwell::codesign {
 
@@ -36,29 +36,29 @@ inline constexpr std::size_t kMaximumCertificates = 64;
 
 /// An AlgorithmIdentifier.
 struct Algorithm {
-    foundation::ByteView identifier;  // contents of the OBJECT IDENTIFIER
-    foundation::ByteView parameters;  // the whole element; empty if there is none
+    base::ByteView identifier;  // contents of the OBJECT IDENTIFIER
+    base::ByteView parameters;  // the whole element; empty if there is none
 };
 
 /// The fields of an X.509 certificate for choosing the signer's certificate, and its key. Nothing is
 /// verified.
 struct MessageCertificate {
-    foundation::ByteView whole;
-    foundation::ByteView issuer;                    // the whole Name
-    foundation::ByteView serialNumber;              // contents of the INTEGER
-    foundation::ByteView publicKey;                 // the whole SubjectPublicKeyInfo
-    std::optional<foundation::Data> keyIdentifier;  // of the extension 2.5.29.14
+    base::ByteView whole;
+    base::ByteView issuer;                    // the whole Name
+    base::ByteView serialNumber;              // contents of the INTEGER
+    base::ByteView publicKey;                 // the whole SubjectPublicKeyInfo
+    std::optional<base::Data> keyIdentifier;  // of the extension 2.5.29.14
 };
 
 struct MessageSigner {
     int version = 1;
-    foundation::ByteView issuer;                    // and serial number; empty if there is a key identifier
-    foundation::ByteView serialNumber;              // contents of the INTEGER
-    std::optional<foundation::Data> keyIdentifier;  // instead of both
+    base::ByteView issuer;                    // and serial number; empty if there is a key identifier
+    base::ByteView serialNumber;              // contents of the INTEGER
+    std::optional<base::Data> keyIdentifier;  // instead of both
     Algorithm digestAlgorithm;
     std::optional<ber::Element> signedAttributes;
     Algorithm signatureAlgorithm;
-    foundation::Data signature;
+    base::Data signature;
     std::optional<ber::Element> unsignedAttributes;
 };
 
@@ -66,8 +66,8 @@ struct MessageSigner {
 struct SignedMessage {
     int version = 1;
     std::vector<Algorithm> digestAlgorithms;
-    foundation::ByteView contentType;         // contents of the OBJECT IDENTIFIER
-    std::optional<foundation::Data> content;  // nullopt: detached
+    base::ByteView contentType;         // contents of the OBJECT IDENTIFIER
+    std::optional<base::Data> content;  // nullopt: detached
     std::vector<MessageCertificate> certificates;
     std::size_t otherCertificates = 0;  // of other forms than X.509
     bool hasRevocationLists = false;
@@ -75,11 +75,11 @@ struct SignedMessage {
 };
 
 /// Reads a message that fills `bytes`. Throws CodeError.
-SignedMessage parseSignedMessage(foundation::ByteView bytes);
+SignedMessage parseSignedMessage(base::ByteView bytes);
 
 /// The value of an attribute by its type, the contents of an OBJECT IDENTIFIER; nullopt unless `attributes`
 /// has exactly one attribute of the type, with exactly one value. Throws CodeError if any is malformed.
-std::optional<ber::Element> soleValueOf(const ber::Element& attributes, foundation::ByteView type,
+std::optional<ber::Element> soleValueOf(const ber::Element& attributes, base::ByteView type,
                                         const char* what);
 
 /// An AlgorithmIdentifier, the next element of `reader`. Throws CodeError.
@@ -87,16 +87,16 @@ Algorithm readAlgorithm(ber::Reader& reader, ber::Work& work, const char* what);
 
 /// Whether `attributes` has an attribute of another type. Throws CodeError if any is
 /// malformed.
-bool hasAttributeBeside(const ber::Element& attributes, foundation::ByteView type, const char* what);
+bool hasAttributeBeside(const ber::Element& attributes, base::ByteView type, const char* what);
 
 /// The views refer to the parsed bytes.
 struct TimeStamp {
     Algorithm imprintAlgorithm;
-    foundation::ByteView imprint;
-    foundation::Date time;  // without the fraction
+    base::ByteView imprint;
+    values::Date time;  // without the fraction
 };
 
 /// Reads a TSTInfo that fills `bytes`. Fields after the time are not read. Throws CodeError.
-TimeStamp parseTimeStamp(foundation::ByteView bytes);
+TimeStamp parseTimeStamp(base::ByteView bytes);
 
 }  // namespace pinwell::codesign

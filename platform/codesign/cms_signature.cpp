@@ -9,26 +9,26 @@
 #include <bit>
 #include <string_view>
 
+#include "base/handle.h"
 #include "codesign/cms_message.h"
 #include "codesign/code_error.h"
 #include "crypto/openssl.h"
-#include "foundation/handle.h"
 
 namespace pinwell::codesign {
 
+using base::asBytes;
+using base::ByteView;
+using base::Data;
 using ber::Reader;
 using ber::Work;
 using crypto::ErrorQueueGuard;
 using crypto::unsignedBytes;
-using foundation::asBytes;
-using foundation::ByteView;
-using foundation::Data;
-using foundation::Date;
+using values::Date;
 
 namespace {
 
-using Key = foundation::Handle<EVP_PKEY, EVP_PKEY_free>;
-using DigestContext = foundation::Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
+using Key = base::Handle<EVP_PKEY, EVP_PKEY_free>;
+using DigestContext = base::Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
 
 constexpr const char* kPublicKey = "the signer's key";
 constexpr const char* kPssParameters = "the signature's algorithm";
@@ -196,7 +196,7 @@ std::optional<Data> messageDigest(const Algorithm& algorithm, ByteView bytes) {
     unsigned length = 0;
     if (EVP_Digest(bytes.data(), bytes.size(), value.data(), &length, digest, nullptr) != 1)
         return std::nullopt;
-    return foundation::toData(std::as_bytes(std::span(value)).first(length));
+    return base::toData(std::as_bytes(std::span(value)).first(length));
 }
 
 /// Verifies `signature` over `bytes` with a SubjectPublicKeyInfo. The digest is the signer's
@@ -226,7 +226,7 @@ void requireSignature(ByteView publicKey, const Algorithm& digestAlgorithm,
         refuse("the signer's signature does not verify");
 }
 
-using Name = foundation::Handle<X509_NAME, X509_NAME_free>;
+using Name = base::Handle<X509_NAME, X509_NAME_free>;
 
 constexpr const char* kSignedAttributes = "the signed attributes";
 constexpr const char* kUnsignedAttributes = "the unsigned attributes";

@@ -10,9 +10,9 @@
 
 #include <optional>
 
+#include "base/bytes.h"
 #include "codesign/cms_message.h"
-#include "foundation/bytes.h"
-#include "foundation/date.h"
+#include "values/date.h"
 
 namespace pinwell::codesign {
 
@@ -29,10 +29,10 @@ inline constexpr std::size_t kMaximumPublicKeySize = 4096;
 /// If there are signed attributes, the signature covers them, in DER and in their order in the message. Their
 /// content type must be the message's, and their message digest that of `content`. Otherwise `content` itself
 /// is signed; only a message of plain data may have no attributes.
-void requireDetachedCms(foundation::ByteView cms, foundation::ByteView content);
+void requireDetachedCms(base::ByteView cms, base::ByteView content);
 
 /// The time in the signer's time-stamp token, if the token's own signature verifies with a certificate inside
 /// it and its imprint matches the signer's signature value; otherwise nullopt.
-std::optional<foundation::Date> secureTimestamp(foundation::ByteView cms);
+std::optional<values::Date> secureTimestamp(base::ByteView cms);
 
 }  // namespace pinwell::codesign

@@ -4,10 +4,10 @@
 #include <limits>
 #include <map>
 
+#include "base/byte_io.h"
 #include "codesign/cms_signature.h"
 #include "codesign/code_error.h"
 #include "codesign/superblob.h"
-#include "foundation/byte_reader.h"
 
 namespace pinwell::codesign {
 namespace {
@@ -23,7 +23,7 @@ void guarded(Body body, Failed failed) {
         body();
     } catch (const CodeError& error) {
         failed(error.status(), error.what());
-    } catch (const foundation::ShortRead& error) {
+    } catch (const base::ShortRead& error) {
         failed(kInvalidSignature, error.what());
     }
 }
@@ -159,7 +159,7 @@ const SliceDescription* CodeDescription::preferredSlice() const {
     return found == slices.end() ? nullptr : &*found;
 }
 
-SignatureDescription describeSignature(const foundation::SharedBytes& area) {
+SignatureDescription describeSignature(const base::SharedBytes& area) {
     return describeSuperBlob(area, [](SignatureComponents components) { return components; });
 }
 

@@ -79,10 +79,10 @@ struct CodeDescription {
 inline constexpr std::size_t kMaximumBlobsDescribed = 1024;
 
 /// The signature in the bytes of a superblob, or of the area reserved for one.
-SignatureDescription describeSignature(const foundation::SharedBytes& area);
+SignatureDescription describeSignature(const base::SharedBytes& area);
 
 /// By default it handles bundles like the service of makeCodeSigningService().
-CodeDescription describeCode(const std::string& path, const CodeAccess& access = accessThrough(
-                                                          std::make_shared<foundation::Places>()));
+CodeDescription describeCode(const std::string& path,
+                             const CodeAccess& access = accessThrough(std::make_shared<base::Places>()));
 
 }  // namespace pinwell::codesign

@@ -3,12 +3,12 @@
 #include <algorithm>
 #include <utility>
 
+#include "base/byte_io.h"
 #include "codesign/code_error.h"
-#include "foundation/byte_reader.h"
 
 namespace pinwell::codesign {
 
-using foundation::ByteReader;
+using base::ByteReader;
 
 namespace {
 
@@ -73,7 +73,7 @@ std::string readString(const ByteReader& whole, const Header& header, std::uint3
     const ByteView rest = reader.bytes(reader.remaining(), what);
     const auto end = std::find(rest.begin(), rest.end(), std::byte{0});
     if (end == rest.end()) refuse(std::string(what) + " has no end");
-    return foundation::toString(rest.first(static_cast<std::size_t>(end - rest.begin())));
+    return base::toString(rest.first(static_cast<std::size_t>(end - rest.begin())));
 }
 
 void checkDigests(const ByteReader& whole, const Header& header) {
@@ -145,7 +145,7 @@ int digestStrength(DigestType type) {
 }
 
 Data digest(DigestType type, ByteView bytes) {
-    return foundation::toData(crypto::threadHasher(algorithmOf(type)).of(bytes).first(digestSize(type)));
+    return base::toData(crypto::threadHasher(algorithmOf(type)).of(bytes).first(digestSize(type)));
 }
 
 std::size_t codeDirectoryHeaderSize(std::uint32_t version) {
@@ -196,7 +196,7 @@ std::optional<Data> CodeDirectory::specialSlotDigest(std::uint32_t slot) const {
     const bool zero =
         std::all_of(stated.begin(), stated.end(), [](std::byte b) { return b == std::byte{0}; });
     if (zero) return std::nullopt;
-    return foundation::toData(stated);
+    return base::toData(stated);
 }
 
 Data CodeDirectory::codeHash() const {

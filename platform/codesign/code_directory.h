@@ -35,14 +35,14 @@
 #include <optional>
 #include <string>
 
+#include "base/bytes.h"
 #include "codesign/code_signing.h"
 #include "crypto/crypto.h"
-#include "foundation/sparse_bytes.h"
 
 namespace pinwell::codesign {
 
-using foundation::ByteView;
-using foundation::SharedBytes;
+using base::ByteView;
+using base::SharedBytes;
 
 inline constexpr std::uint32_t kCodeDirectoryMagic = 0xFADE0C02;
 inline constexpr std::uint32_t kOldestCodeDirectoryVersion = 0x20001;
@@ -89,7 +89,7 @@ std::size_t codeDirectoryHeaderSize(std::uint32_t version);
 /// A well-formed code directory. A value: it shares its bytes.
 class CodeDirectory {
   public:
-    /// `blob` has its header and no trailing bytes. Throws CodeError or foundation::ShortRead if it is not
+    /// `blob` has its header and no trailing bytes. Throws CodeError or base::ShortRead if it is not
     /// well formed.
     static CodeDirectory parse(SharedBytes blob);
 

@@ -2,10 +2,10 @@
 
 #include <algorithm>
 
+#include "base/byte_io.h"
 #include "codesign/cms_signature.h"
 #include "codesign/code_error.h"
 #include "codesign/superblob.h"
-#include "foundation/byte_reader.h"
 
 namespace pinwell::codesign {
 

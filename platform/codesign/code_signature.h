@@ -19,7 +19,7 @@ struct SignatureComponents {
 };
 
 /// The components of a superblob, which they share; unneeded components are left out. Throws CodeError or
-/// foundation::ShortRead.
+/// base::ShortRead.
 SignatureComponents componentsOfSuperBlob(const SharedBytes& superblob);
 
 /// A signature whose code directories are well formed. Immutable.
@@ -27,7 +27,7 @@ class CodeSignature {
   public:
     /// Returns `nullopt` if there is no code directory, as in a superblob with only a ticket. Before the
     /// call, outside components are added under the number of their special slot, such as a disk image's
-    /// trailer. Throws CodeError or foundation::ShortRead if a code directory is not well formed, if there
+    /// trailer. Throws CodeError or base::ShortRead if a code directory is not well formed, if there
     /// are too many or two of one digest type, or if there are only alternates. An alternate of an unknown
     /// digest type is skipped.
     static std::optional<CodeSignature> parse(SignatureComponents components);

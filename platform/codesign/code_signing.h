@@ -10,23 +10,23 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/date.h"
-#include "foundation/error.h"
-#include "foundation/places.h"
-#include "foundation/url.h"
+#include "base/bytes.h"
+#include "base/error.h"
+#include "base/places.h"
+#include "values/date.h"
+#include "values/url.h"
 
 namespace pinwell::codesign {
 
-using foundation::Data;
-using foundation::Date;
-using foundation::Result;
-using foundation::URL;
+using base::Data;
+using base::Result;
+using values::Date;
+using values::URL;
 
 /// A platform status; 0 is success.
 using Status = std::int32_t;
 inline constexpr Status kSuccess = 0;
-using foundation::kParameterError;  // -50
+using base::kParameterError;  // -50
 inline constexpr Status kUnimplemented = -67072;
 inline constexpr Status kStaticCodeNotFound = -67070;  // no file that could be code
 inline constexpr Status kInvalidSignature = -67061;    // a signature is present but wrong
@@ -110,20 +110,20 @@ class CodeSigningService {
     /// this method and the next two.
     virtual Result<std::shared_ptr<Signer>> makeSigner(const SignerParameters&,
                                                        std::uint32_t /*flags*/) const {
-        return foundation::Error::osStatus(kUnimplemented);
+        return base::Error::osStatus(kUnimplemented);
     }
 
     /// Signs the file of `code` ad hoc, and replaces the contents of the signer's detached buffer. Reads
     /// every byte of the file, with bounded memory. `flags` must be 0. The same bytes give the same
     /// signature.
     virtual Result<void> addSignature(Signer&, const StaticCode&, std::uint32_t /*flags*/) const {
-        return foundation::Error::osStatus(kUnimplemented);
+        return base::Error::osStatus(kUnimplemented);
     }
 
     /// From now on `code` is described by the signature in `detached`. `flags` must be 0.
     virtual Result<void> setDetachedSignature(StaticCode&, const Data& /*detached*/,
                                               std::uint32_t /*flags*/) const {
-        return foundation::Error::osStatus(kUnimplemented);
+        return base::Error::osStatus(kUnimplemented);
     }
 
     /// Every code hash of the artefact at `path`: the cdhashes of all code directories of all signed slices,
@@ -137,6 +137,6 @@ class CodeSigningService {
 /// The service over files of this machine. Paths are resolved through `places`: a held item is reached only
 /// through its descriptor.
 std::unique_ptr<CodeSigningService> makeCodeSigningService(
-    std::shared_ptr<foundation::Places> places = std::make_shared<foundation::Places>());
+    std::shared_ptr<base::Places> places = std::make_shared<base::Places>());
 
 }  // namespace pinwell::codesign

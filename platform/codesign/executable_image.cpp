@@ -4,12 +4,12 @@
 #include <utility>
 #include <vector>
 
+#include "base/byte_io.h"
 #include "codesign/code_error.h"
-#include "foundation/byte_reader.h"
 
 namespace pinwell::codesign {
 
-using foundation::ByteReader;
+using base::ByteReader;
 
 namespace {
 

@@ -73,7 +73,7 @@ std::vector<ImageSlice> readSlices(const ByteSource& source);
 const ImageSlice& preferredSlice(const std::vector<ImageSlice>& slices);
 
 /// The place of a slice's signature in the file; `nullopt` if it is not signed. Throws CodeError or
-/// foundation::ShortRead.
+/// base::ShortRead.
 std::optional<FileRange> findImageSignature(const ByteSource& source, const ImageSlice& slice);
 
 }  // namespace pinwell::codesign

@@ -10,15 +10,15 @@
 #include <set>
 #include <type_traits>
 
+#include "base/byte_io.h"
 #include "codesign/adhoc_signer.h"
 #include "codesign/code_error.h"
-#include "foundation/byte_reader.h"
 
 namespace pinwell::codesign {
 
 namespace {
 
-using foundation::Error;
+using base::Error;
 
 /// Longest identifier; real ones are about as long as a domain name.
 constexpr std::size_t kMaximumIdentifierLength = 1024;
@@ -32,7 +32,7 @@ auto guarded(Body body) -> decltype(body()) {
         return body();
     } catch (const CodeError& error) {
         return Error::osStatus(error.status());
-    } catch (const foundation::ShortRead&) {
+    } catch (const base::ShortRead&) {
         return Error::osStatus(kInvalidSignature);
     }
 }
@@ -115,7 +115,7 @@ class BundleWalk {
             std::move(signatures.begin(), signatures.end(), std::back_inserter(found_));
         } catch (const CodeError&) {
             // Skipped: bad code in the bundle must not hide the good code.
-        } catch (const foundation::ShortRead&) {
+        } catch (const base::ShortRead&) {
         }
     }
 
@@ -223,7 +223,7 @@ Result<std::vector<SigningInformation>> FileCodeSigningService::allCodeHashes(co
     });
 }
 
-std::unique_ptr<CodeSigningService> makeCodeSigningService(std::shared_ptr<foundation::Places> places) {
+std::unique_ptr<CodeSigningService> makeCodeSigningService(std::shared_ptr<base::Places> places) {
     return std::make_unique<FileCodeSigningService>(accessThrough(std::move(places)));
 }
 

@@ -3,7 +3,7 @@
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
 #include "codesign/superblob.h"
-#include "foundation/bundle.h"
+#include "values/bundle.h"
 
 namespace pinwell::codesign {
 
@@ -31,19 +31,19 @@ std::uint64_t DiskImageTrailer::signedLimit() const {
 Data DiskImageTrailer::canonicalBytes() const {
     UDIFFileHeader canonical = header_;
     canonical.setCodeSign(0, 0);
-    return foundation::toData(canonical.bytes());
+    return base::toData(canonical.bytes());
 }
 
-CodeAccess accessThrough(std::shared_ptr<foundation::Places> places) {
-    return {std::move(places), [](foundation::Places& all, const std::string& path) {
-                return foundation::mainExecutableOfBundle(all, path);
+CodeAccess accessThrough(std::shared_ptr<base::Places> places) {
+    return {std::move(places), [](base::Places& all, const std::string& path) {
+                return values::mainExecutableOfBundle(all, path);
             }};
 }
 
 namespace {
 
 /// A whole file of the separate form; `nullopt` if it does not exist.
-std::optional<SharedBytes> readSignatureFile(const foundation::Places& places, const std::string& path) {
+std::optional<SharedBytes> readSignatureFile(const base::Places& places, const std::string& path) {
     try {
         const FileSource file(places, path);
         return file.readShared(0, file.size());
@@ -55,7 +55,7 @@ std::optional<SharedBytes> readSignatureFile(const foundation::Places& places, c
 
 }  // namespace
 
-std::optional<SignatureComponents> componentsOfSeparateFiles(const foundation::Places& places,
+std::optional<SignatureComponents> componentsOfSeparateFiles(const base::Places& places,
                                                              const std::string& directory) {
     std::optional<SharedBytes> codeDirectory = readSignatureFile(places, directory + "/CodeDirectory");
     if (!codeDirectory) return std::nullopt;
@@ -71,7 +71,7 @@ std::optional<SignatureComponents> componentsOfSeparateFiles(const foundation::P
 
 FileCode::FileCode(CodeKind kind, std::string file, std::unique_ptr<ByteSource> source,
                    std::optional<DiskImageTrailer> trailer, std::string signatureDirectory,
-                   std::shared_ptr<foundation::Places> places, foundation::Anchor anchor)
+                   std::shared_ptr<base::Places> places, base::Anchor anchor)
     : kind_(kind),
       file_(std::move(file)),
       source_(std::move(source)),
@@ -81,7 +81,7 @@ FileCode::FileCode(CodeKind kind, std::string file, std::unique_ptr<ByteSource> 
       anchor_(std::move(anchor)) {}
 
 std::shared_ptr<FileCode> FileCode::atPath(const std::string& path, const CodeAccess& access) {
-    foundation::Result<foundation::Anchor> anchor = access.places->hold(path);
+    base::Result<base::Anchor> anchor = access.places->hold(path);
     if (!anchor) throw CodeError(statusOfLookup(anchor.error().code()), "cannot examine the path");
     const bool bundle = (*anchor)->isTree();
     const std::optional<std::string> file = bundle ? access.finder(*access.places, path) : path;

@@ -20,11 +20,11 @@
 #include <string>
 #include <vector>
 
+#include "base/places.h"
 #include "codesign/byte_source.h"
 #include "codesign/code_signature.h"
 #include "codesign/executable_image.h"
 #include "formats/disk_image.h"
-#include "foundation/places.h"
 
 namespace pinwell::codesign {
 
@@ -61,22 +61,22 @@ class DiskImageTrailer {
 
 /// The path of the main executable of a directory opened as a bundle; `nullopt` if it has none.
 using MainExecutableFinder =
-    std::function<std::optional<std::string>(foundation::Places&, const std::string& bundlePath)>;
+    std::function<std::optional<std::string>(base::Places&, const std::string& bundlePath)>;
 
 /// Access to code. Copies share the places.
 struct CodeAccess {
-    std::shared_ptr<foundation::Places> places;
+    std::shared_ptr<base::Places> places;
     MainExecutableFinder finder;
 };
 
 /// Access through `places`, with the bundles' main executables.
-CodeAccess accessThrough(std::shared_ptr<foundation::Places> places);
+CodeAccess accessThrough(std::shared_ptr<base::Places> places);
 
 enum class CodeKind { executableImage, diskImage, opaqueFile, separatelySigned };
 
 /// The components of a signature in separate files, from their directory; `nullopt` if there is no code
 /// directory. Throws CodeError.
-std::optional<SignatureComponents> componentsOfSeparateFiles(const foundation::Places& places,
+std::optional<SignatureComponents> componentsOfSeparateFiles(const base::Places& places,
                                                              const std::string& directory);
 
 /// The StaticCode of this service. Keeps the file and its bundle open, so that all results are about one file
@@ -107,20 +107,20 @@ class FileCode final : public StaticCode {
     /// Adds the components in the file itself to the components of a superblob.
     SignatureComponents completed(SignatureComponents components) const;
 
-    /// The signature; `nullopt` if the code is not signed. Throws CodeError or foundation::ShortRead.
+    /// The signature; `nullopt` if the code is not signed. Throws CodeError or base::ShortRead.
     const std::optional<CodeSignature>& signature() const;
 
     /// The signatures of all slices, in the order of the slices; the code's only signature if there are no
-    /// slices. Unsigned slices have no entry. Throws CodeError or foundation::ShortRead.
+    /// slices. Unsigned slices have no entry. Throws CodeError or base::ShortRead.
     std::vector<CodeSignature> allSignatures() const;
 
-    /// Uses the signature in `superblob` from now on. Throws CodeError or foundation::ShortRead.
+    /// Uses the signature in `superblob` from now on. Throws CodeError or base::ShortRead.
     void setDetachedSignature(const SharedBytes& superblob);
 
   private:
     FileCode(CodeKind kind, std::string file, std::unique_ptr<ByteSource> source,
              std::optional<DiskImageTrailer> trailer, std::string signatureDirectory,
-             std::shared_ptr<foundation::Places> places, foundation::Anchor anchor);
+             std::shared_ptr<base::Places> places, base::Anchor anchor);
 
     std::optional<CodeSignature> readSignature() const;
     std::optional<CodeSignature> signatureFrom(const SharedBytes& superblob) const;
@@ -130,8 +130,8 @@ class FileCode final : public StaticCode {
     std::unique_ptr<ByteSource> source_;
     std::optional<DiskImageTrailer> trailer_;
     std::string signatureDirectory_;  // of a bundle; empty for a plain file
-    std::shared_ptr<foundation::Places> places_;
-    foundation::Anchor anchor_;  // of the code's path
+    std::shared_ptr<base::Places> places_;
+    base::Anchor anchor_;  // of the code's path
 
     // Read on first use; the inner one is empty for unsigned code.
     mutable std::optional<std::optional<CodeSignature>> signature_;

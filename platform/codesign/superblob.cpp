@@ -2,13 +2,12 @@
 
 #include <algorithm>
 
+#include "base/byte_io.h"
 #include "codesign/code_error.h"
-#include "foundation/byte_reader.h"
-#include "foundation/byte_writer.h"
 
 namespace pinwell::codesign {
 
-using foundation::ByteReader;
+using base::ByteReader;
 
 namespace {
 
@@ -76,13 +75,13 @@ std::vector<Blob> parseSuperBlob(ByteView superblob) {
 
 Data buildSuperBlob(const std::vector<std::pair<std::uint32_t, Data>>& blobs) {
     const std::size_t first = kSuperblobHeaderSize + kBlobIndexEntrySize * blobs.size();
-    foundation::ByteWriter index;
-    foundation::ByteWriter content;
+    base::ByteWriter index;
+    base::ByteWriter content;
     for (const auto& [slot, bytes] : blobs) {
         index.be32(slot).be32(static_cast<std::uint32_t>(first + content.size()));
         content.bytes(bytes);
     }
-    foundation::ByteWriter writer;
+    base::ByteWriter writer;
     writer.be32(kSuperblobMagic).be32(static_cast<std::uint32_t>(first + content.size()));
     writer.be32(static_cast<std::uint32_t>(blobs.size())).bytes(index.data()).bytes(content.data());
     return std::move(writer).take();

@@ -33,7 +33,7 @@ struct Blob {
 };
 
 /// The blobs, in index order, as views of `superblob`, which may have padding after it. Throws CodeError or
-/// foundation::ShortRead.
+/// base::ShortRead.
 std::vector<Blob> parseSuperBlob(ByteView superblob);
 
 /// The superblob in `source` at `offset`, in an area of `areaLength` bytes, without its padding. Only the

@@ -105,7 +105,7 @@ Hasher& threadHasher(Digest digest) {
 }
 
 Data digestOf(Digest digest, ByteView bytes) {
-    return foundation::toData(threadHasher(digest).of(bytes));
+    return base::toData(threadHasher(digest).of(bytes));
 }
 
 std::optional<Data> availableDigestOf(Digest digest, ByteView bytes) {

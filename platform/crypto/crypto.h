@@ -5,12 +5,12 @@
 #include <memory>
 #include <optional>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::crypto {
 
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteView;
+using base::Data;
 
 /// Every digest that an artefact may state (FIPS 180-4, RFC 1321).
 enum class Digest { md5, sha1, sha224, sha256, sha384, sha512 };

@@ -8,12 +8,12 @@
 #include <openssl/x509.h>
 #include <openssl/x509v3.h>
 
-#include "foundation/bytes.h"
-#include "foundation/handle.h"
+#include "base/bytes.h"
+#include "base/handle.h"
 
 namespace pinwell::crypto {
 
-using foundation::Handle;
+using base::Handle;
 
 /// Restores this thread's OpenSSL error queue: a TLS session on the same thread reads that queue too, and
 /// would mistake our refusals for its own.
@@ -25,16 +25,16 @@ class ErrorQueueGuard {
     ErrorQueueGuard& operator=(const ErrorQueueGuard&) = delete;
 };
 
-inline const unsigned char* unsignedBytes(foundation::ByteView bytes) {
+inline const unsigned char* unsignedBytes(base::ByteView bytes) {
     return static_cast<const unsigned char*>(static_cast<const void*>(bytes.data()));
 }
 
-inline foundation::ByteView byteView(const unsigned char* bytes, int length) {
+inline base::ByteView byteView(const unsigned char* bytes, int length) {
     if (bytes == nullptr || length <= 0) return {};
     return {static_cast<const std::byte*>(static_cast<const void*>(bytes)), static_cast<std::size_t>(length)};
 }
 
-inline foundation::ByteView byteView(const ASN1_STRING* string) {
+inline base::ByteView byteView(const ASN1_STRING* string) {
     if (string == nullptr) return {};
     return byteView(ASN1_STRING_get0_data(string), ASN1_STRING_length(string));
 }

@@ -4,16 +4,16 @@
 #include <string>
 #include <utility>
 
-#include "foundation/file_io.h"
-#include "foundation/json.h"
-#include "foundation/process.h"
-#include "foundation/value.h"
+#include "base/file_io.h"
+#include "runtime/process.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::defaults {
 namespace {
 
-using foundation::Dictionary;
-using foundation::Value;
+using values::Dictionary;
+using values::Value;
 
 class Domain final : public UserDefaults {
   public:
@@ -52,10 +52,10 @@ class Domain final : public UserDefaults {
 // The directory of the domains; `nullopt` if the environment does not name it, or is not trusted.
 std::optional<std::string> configurationDirectory() {
     // A relative path in this variable must be ignored (XDG Base Directory Specification).
-    if (auto directory = foundation::secureEnvironment("XDG_CONFIG_HOME");
+    if (auto directory = runtime::secureEnvironment("XDG_CONFIG_HOME");
         directory && directory->starts_with('/'))
         return directory;
-    if (auto home = foundation::secureEnvironment("HOME"); home && home->starts_with('/'))
+    if (auto home = runtime::secureEnvironment("HOME"); home && home->starts_with('/'))
         return *home + "/.config";
     return std::nullopt;
 }
@@ -63,9 +63,9 @@ std::optional<std::string> configurationDirectory() {
 Dictionary readDomain(std::string_view domain) {
     const std::optional<std::string> path = domainFile(domain);
     if (!path) return {};
-    const auto document = foundation::readSmallFile(*path, kMaximumDomainFile);
+    const auto document = base::readSmallFile(*path, kMaximumDomainFile);
     if (!document) return {};
-    const auto values = foundation::parseJSON(*document);
+    const auto values = values::parseJSON(*document);
     if (!values || values->dictionary() == nullptr) return {};
     return *values->dictionary();
 }
@@ -81,7 +81,7 @@ class Service final : public UserDefaultsService {
 
 std::optional<std::string> domainFile(std::string_view domain) {
     const std::optional<std::string> directory = configurationDirectory();
-    if (!directory || !foundation::isSafeFileName(domain)) return std::nullopt;
+    if (!directory || !base::isSafeFileName(domain)) return std::nullopt;
     return *directory + "/" + std::string(domain) + ".json";
 }
 

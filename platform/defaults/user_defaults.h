@@ -6,7 +6,7 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/value_fwd.h"
+#include "values/value.h"
 
 namespace pinwell::defaults {
 
@@ -19,7 +19,7 @@ inline constexpr std::size_t kMaximumDomainFile = 1024 * 1024;
 class UserDefaults {
   public:
     virtual ~UserDefaults() = default;
-    virtual void registerDefaults(foundation::Dictionary defaults) = 0;
+    virtual void registerDefaults(values::Dictionary defaults) = 0;
     virtual std::string stringForKey(std::string_view key) const = 0;  // empty if neither has it
     virtual bool boolForKey(std::string_view key) const = 0;           // false if neither has it
 };

@@ -12,20 +12,20 @@
 #include <optional>
 #include <string>
 
+#include "base/bytes.h"
+#include "base/error.h"
+#include "base/places.h"
 #include "files/file_reader.h"
-#include "foundation/bytes.h"
-#include "foundation/error.h"
-#include "foundation/places.h"
-#include "foundation/url.h"
-#include "foundation/value_fwd.h"
+#include "values/url.h"
+#include "values/value.h"
 
 namespace pinwell::files {
 
-using foundation::ByteView;
-using foundation::Data;
-using foundation::Dictionary;
-using foundation::Result;
-using foundation::URL;
+using base::ByteView;
+using base::Data;
+using base::Result;
+using values::Dictionary;
+using values::URL;
 
 /// The facts about the path itself; a link in its last component is not followed.
 struct ItemFacts {
@@ -125,8 +125,8 @@ class FileManager {
                                                        const std::function<void()>& waiting) = 0;
 
     /// Holds the item: until the result is destroyed, this manager resolves it, and all paths below a
-    /// directory, from the descriptor opened now (foundation::Places).
-    virtual Result<foundation::Anchor> holdItem(const URL& item) = 0;
+    /// directory, from the descriptor opened now (base::Places).
+    virtual Result<base::Anchor> holdItem(const URL& item) = 0;
 
     /// Main executable of the directory, opened as a bundle.
     virtual std::optional<URL> mainExecutableOfBundle(const URL& directory) const = 0;
@@ -189,7 +189,6 @@ class FileManager {
 /// The file manager of this machine. `typeNaming` must be callable from any thread. Paths are resolved
 /// through `places`, which other services may share.
 std::unique_ptr<FileManager> makeLocalFileManager(
-    TypeNaming typeNaming,
-    std::shared_ptr<foundation::Places> places = std::make_shared<foundation::Places>());
+    TypeNaming typeNaming, std::shared_ptr<base::Places> places = std::make_shared<base::Places>());
 
 }  // namespace pinwell::files

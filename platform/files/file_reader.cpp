@@ -7,6 +7,7 @@
 #include <limits>
 #include <utility>
 
+#include "base/file_io.h"
 #include "files/operations.h"
 
 namespace pinwell::files {
@@ -69,7 +70,7 @@ Result<std::unique_ptr<FileReader>> readerOf(int descriptor, std::string name) {
     if ((flags & O_ACCMODE) == O_WRONLY || (flags & O_PATH) != 0) return Error::posix(EBADF, name);
     struct stat status {};
     if (fstat(descriptor, &status) != 0) return lastError(name);
-    if (const int reason = foundation::notRegularReason(status.st_mode); reason != 0)
+    if (const int reason = base::notRegularReason(status.st_mode); reason != 0)
         return Error::posix(reason, name);
     return std::unique_ptr<FileReader>(std::make_unique<DescriptorReader>(descriptor, std::move(name)));
 }

@@ -8,9 +8,8 @@
 #include <stdexcept>
 #include <string>
 
-#include "foundation/bytes.h"
-#include "foundation/error.h"
-#include "foundation/sparse_bytes.h"
+#include "base/bytes.h"
+#include "base/error.h"
 
 namespace pinwell::files {
 
@@ -32,7 +31,7 @@ class FileReader {
     virtual std::uint64_t position() = 0;
 
     /// Up to `length` bytes; fewer only at the end of the file. Memory grows with the bytes really read.
-    virtual foundation::Data read(std::uint64_t length) = 0;
+    virtual base::Data read(std::uint64_t length) = 0;
 
     /// The first position from `position` on that may have non-zero bytes: in a sparse file the end of a
     /// hole. The read position does not change.
@@ -41,19 +40,19 @@ class FileReader {
 
 /// Up to `length` bytes from the position on; fewer only at the end of the file. For lengths that a file
 /// claims: memory is taken only for non-zero bytes, not for holes. Throws FileHandleError.
-foundation::SharedBytes readShared(FileReader& file, std::uint64_t length);
+base::SharedBytes readShared(FileReader& file, std::uint64_t length);
 
 /// A buffer of that length. Throws FileHandleError if there is no address space for it.
-foundation::SparseBuffer makeBuffer(std::uint64_t length);
+base::SparseBuffer makeBuffer(std::uint64_t length);
 
 /// The regular file at `path`, opened close-on-exec. Follows no link in the last component and never blocks
 /// on anything but a regular file (EINVAL, EISDIR, ELOOP).
-foundation::Result<std::unique_ptr<FileReader>> openReader(const std::string& path);
+base::Result<std::unique_ptr<FileReader>> openReader(const std::string& path);
 
 /// A reader of a descriptor that stays the caller's: it must be open for reading as long as the reader lives,
 /// and its own position is neither used nor moved. Anything but a regular file is
 /// refused as above, and an unreadable descriptor with EBADF. Errors call the file
 /// `name`.
-foundation::Result<std::unique_ptr<FileReader>> readerOf(int descriptor, std::string name);
+base::Result<std::unique_ptr<FileReader>> readerOf(int descriptor, std::string name);
 
 }  // namespace pinwell::files

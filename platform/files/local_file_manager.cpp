@@ -5,9 +5,9 @@
 #include <vector>
 
 #include "files/operations.h"
-#include "foundation/bundle.h"
-#include "foundation/process.h"
-#include "foundation/value.h"
+#include "runtime/process.h"
+#include "values/bundle.h"
+#include "values/value.h"
 
 namespace pinwell::files {
 namespace {
@@ -76,7 +76,7 @@ class LocalFileManager final : public FileManager {
         return lockPath(*places_, *path, kLockPatience, waiting);
     }
 
-    Result<foundation::Anchor> holdItem(const URL& item) override {
+    Result<base::Anchor> holdItem(const URL& item) override {
         const auto path = pathOf(item);
         if (!path) return path.error();
         return places_->hold(*path);
@@ -85,7 +85,7 @@ class LocalFileManager final : public FileManager {
     std::optional<URL> mainExecutableOfBundle(const URL& directory) const override {
         const auto path = pathOf(directory);
         if (!path) return std::nullopt;
-        const auto executable = foundation::mainExecutableOfBundle(*places_, *path);
+        const auto executable = values::mainExecutableOfBundle(*places_, *path);
         if (!executable) return std::nullopt;
         return URL::fileURLWithPath(*executable);
     }
@@ -149,7 +149,7 @@ class LocalFileManager final : public FileManager {
         return at(file, [](const Place& place) { return openFileHandle(place, O_RDWR); });
     }
 
-    URL temporaryDirectory() const override { return foundation::temporaryDirectory(); }
+    URL temporaryDirectory() const override { return runtime::temporaryDirectory(); }
 
   private:
     // The result of `operation` for the URL's place, or the error if there is none.
@@ -179,7 +179,7 @@ class LocalFileManager final : public FileManager {
     TypeNaming typeNaming_;
     std::shared_ptr<Places> places_;
     std::mutex mutex_;
-    std::vector<foundation::Anchor> replacementDirectories_;
+    std::vector<base::Anchor> replacementDirectories_;
 };
 
 }  // namespace

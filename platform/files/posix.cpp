@@ -6,6 +6,8 @@
 #include <algorithm>
 #include <utility>
 
+#include "base/file_io.h"
+
 namespace pinwell::files {
 std::string directoryOf(const std::string& path) {
     const std::size_t slash = path.rfind('/');
@@ -14,8 +16,7 @@ std::string directoryOf(const std::string& path) {
 }
 
 Result<OpenFile> openRegularFile(const Place& place, int flags, mode_t mode) {
-    auto file =
-        foundation::openRegularFile(place.directory(), place.name, flags | O_NOFOLLOW, place.path, mode);
+    auto file = base::openRegularFile(place.directory(), place.name, flags | O_NOFOLLOW, place.path, mode);
     if (!file) return file.error();
     return OpenFile{std::move(file->descriptor), place, file->status};
 }

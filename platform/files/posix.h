@@ -10,17 +10,17 @@
 #include <string>
 #include <utility>
 
+#include "base/bytes.h"
+#include "base/handle.h"
+#include "base/places.h"
 #include "files/file_manager.h"
-#include "foundation/bytes.h"
-#include "foundation/file_io.h"
-#include "foundation/places.h"
 
 namespace pinwell::files {
 
-using foundation::Error;
-using foundation::FileDescriptor;
-using foundation::Place;
-using foundation::Places;
+using base::Error;
+using base::FileDescriptor;
+using base::Place;
+using base::Places;
 
 /// Maximum number of bytes in one read or write, and so the maximum growth of memory at a time.
 inline constexpr std::size_t kPieceSize = std::size_t{256} * 1024;
@@ -57,7 +57,7 @@ std::string directoryOf(const std::string& path);
 inline constexpr mode_t kPrivateFile = S_IRUSR | S_IWUSR;
 inline constexpr mode_t kOrdinaryFile = S_IRUSR | S_IWUSR | S_IRGRP | S_IWGRP | S_IROTH | S_IWOTH;
 
-/// Like foundation::openRegularFile, without following a link in the last component.
+/// Like base::openRegularFile, without following a link in the last component.
 Result<OpenFile> openRegularFile(const Place& place, int flags, mode_t mode = kPrivateFile);
 
 /// Creates and opens a file for writing; `place` must not exist yet.

@@ -2,13 +2,13 @@
 #include <new>
 
 #include "files/file_reader.h"
-#include "foundation/format.h"
+#include "values/format.h"
 
 namespace pinwell::files {
 namespace {
 
-using foundation::SharedBytes;
-using foundation::SparseBuffer;
+using base::SharedBytes;
+using base::SparseBuffer;
 
 /// Read at once: large enough for usual signatures and tickets.
 constexpr std::uint64_t kPiece = 1024 * 1024;
@@ -19,7 +19,7 @@ SparseBuffer makeBuffer(std::uint64_t length) {
     try {
         return SparseBuffer(length);
     } catch (const std::bad_alloc&) {
-        throw FileHandleError(foundation::format("Cannot hold %llu bytes", length));
+        throw FileHandleError(values::format("Cannot hold %llu bytes", length));
     }
 }
 
@@ -32,7 +32,7 @@ SharedBytes readShared(FileReader& file, std::uint64_t length) {
         if (data > done) file.seek(start + data);
         done = data;
         const std::uint64_t wanted = std::min(kPiece, length - done);
-        const foundation::Data piece = file.read(wanted);
+        const base::Data piece = file.read(wanted);
         buffer.put(done, piece);
         done += piece.size();
         if (piece.size() < wanted) {

@@ -7,8 +7,8 @@
 #include <memory>
 
 #include "files/operations.h"
-#include "foundation/lazy_library.h"
-#include "foundation/value.h"
+#include "runtime/process.h"
+#include "values/value.h"
 
 namespace pinwell::files {
 namespace {
@@ -16,7 +16,7 @@ namespace {
 // The library's functions, found on first use.
 struct Gio {
     Gio() {
-        foundation::LazyLibrary library("libgio-2.0.so.0");
+        runtime::LazyLibrary library("libgio-2.0.so.0");
         library.find(vfsGetLocal, "g_vfs_get_local");
         library.find(vfsGetFileForPath, "g_vfs_get_file_for_path");
         library.find(fileTrash, "g_file_trash");
@@ -106,8 +106,7 @@ Result<std::string> moveToTrash(const Place& place) {
     if (gio().fileTrash(file.get(), nullptr, &failure) == 0) {
         const ErrorPointer owned(failure);
         return Error::posix(errnoOf(*owned), path)
-            .with(foundation::kUnderlyingErrorKey,
-                  Error(gio().quarkToString(owned->domain), owned->code, owned->message));
+            .causedBy(Error(gio().quarkToString(owned->domain), owned->code, owned->message));
     }
     return currentPath(item->get(), path);
 }

@@ -8,15 +8,15 @@
 #include <mutex>
 #include <set>
 
-#include "foundation/value.h"
 #include "https/transfer_error.h"
+#include "values/value.h"
 
 namespace pinwell::https {
 namespace {
 
 Error writeError(int number, const std::string& path) {
     return makeError(URLErrorCode::cannotWriteFile, "The download could not be written to \"" + path + "\".")
-        .with(foundation::kUnderlyingErrorKey, Error::posix(number, path));
+        .causedBy(Error::posix(number, path));
 }
 
 // Files that exit() must remove: it runs no destructors of objects on any stack.
@@ -58,12 +58,12 @@ class Leftovers {
 
 Result<std::unique_ptr<DownloadFile>> DownloadFile::make(const URL& directory) {
     std::string path = directory.appendingPathComponent("pinwell-download-XXXXXX").path();
-    foundation::FileDescriptor file(::mkostemp(path.data(), O_CLOEXEC));  // it adds O_EXCL and 0600
+    base::FileDescriptor file(::mkostemp(path.data(), O_CLOEXEC));  // it adds O_EXCL and 0600
     if (!file) return writeError(errno, path);
     return std::unique_ptr<DownloadFile>(new DownloadFile(std::move(file), std::move(path)));
 }
 
-DownloadFile::DownloadFile(foundation::FileDescriptor file, std::string path)
+DownloadFile::DownloadFile(base::FileDescriptor file, std::string path)
     : file_(std::move(file)), path_(std::move(path)) {
     Leftovers::shared().add(path_);
 }
@@ -76,7 +76,7 @@ Error DownloadFile::failure(int number) const {
     return writeError(number, path_);
 }
 
-Result<void> DownloadFile::write(foundation::ByteView bytes) {
+Result<void> DownloadFile::write(base::ByteView bytes) {
     while (!bytes.empty()) {
         const ssize_t count = ::write(file_.get(), bytes.data(), bytes.size());
         if (count < 0 && errno == EINTR) continue;

@@ -5,8 +5,8 @@
 #include <string>
 #include <utility>
 
-#include "foundation/bytes.h"
-#include "foundation/file_io.h"
+#include "base/bytes.h"
+#include "base/handle.h"
 #include "https/session.h"
 
 namespace pinwell::https {
@@ -16,14 +16,14 @@ class BodySink {
     virtual ~BodySink() = default;
 
     /// The next piece. An error ends the transfer.
-    virtual Result<void> write(foundation::ByteView bytes) = 0;
+    virtual Result<void> write(base::ByteView bytes) = 0;
 };
 
 /// Keeps the body in memory.
 class MemorySink : public BodySink {
   public:
-    Result<void> write(foundation::ByteView bytes) override {
-        foundation::append(data_, bytes);
+    Result<void> write(base::ByteView bytes) override {
+        base::append(data_, bytes);
         return {};
     }
     Data take() { return std::move(data_); }
@@ -42,7 +42,7 @@ class DownloadFile : public BodySink {
     DownloadFile(const DownloadFile&) = delete;
     DownloadFile& operator=(const DownloadFile&) = delete;
 
-    Result<void> write(foundation::ByteView bytes) override;
+    Result<void> write(base::ByteView bytes) override;
 
     /// Closes it; some file systems report a failed write only then.
     Result<void> finish();
@@ -50,10 +50,10 @@ class DownloadFile : public BodySink {
     URL location() const { return URL::fileURLWithPath(path_); }
 
   private:
-    DownloadFile(foundation::FileDescriptor file, std::string path);
+    DownloadFile(base::FileDescriptor file, std::string path);
     Error failure(int number) const;
 
-    foundation::FileDescriptor file_;
+    base::FileDescriptor file_;
     std::string path_;
 };
 

@@ -4,19 +4,19 @@
 #include <openssl/ssl.h>
 #include <openssl/x509.h>
 
+#include "base/file_io.h"
+#include "base/handle.h"
 #include "crypto/openssl.h"
-#include "foundation/format.h"
-#include "foundation/handle.h"
-#include "foundation/secret_file.h"
 #include "https/connection.h"
+#include "values/format.h"
 
 namespace pinwell::https {
 namespace {
 
-using BioHandle = foundation::Handle<BIO, BIO_free>;
-using CertificateHandle = foundation::Handle<X509, X509_free>;
-using ContextHandle = foundation::Handle<SSL_CTX, SSL_CTX_free>;
-using KeyHandle = foundation::Handle<EVP_PKEY, EVP_PKEY_free>;
+using BioHandle = base::Handle<BIO, BIO_free>;
+using CertificateHandle = base::Handle<X509, X509_free>;
+using ContextHandle = base::Handle<SSL_CTX, SSL_CTX_free>;
+using KeyHandle = base::Handle<EVP_PKEY, EVP_PKEY_free>;
 
 struct FreeList {
     void operator()(STACK_OF(X509) * list) const noexcept { sk_X509_pop_free(list, X509_free); }
@@ -24,7 +24,7 @@ struct FreeList {
 using ListHandle = std::unique_ptr<STACK_OF(X509), FreeList>;
 
 Error wrongFile(std::string text) {
-    return {foundation::kDataErrorDomain, foundation::kMalformedDocument, std::move(text)};
+    return {base::kDataErrorDomain, base::kMalformedDocument, std::move(text)};
 }
 
 // Called only for an encrypted key, before it is decrypted.
@@ -34,16 +34,16 @@ int refusePassphrase(char*, int, int, void* asked) {
 }
 
 Result<KeyHandle> readKey(const std::string& path) {
-    foundation::WipedRoom<kMaximumIdentityKey + 1> room;
-    const auto length = foundation::readSecretFile(path, room.bytes());
+    base::WipedRoom<kMaximumIdentityKey + 1> room;
+    const auto length = base::readSecretFile(path, room.bytes());
     if (!length) return length.error();
     const BioHandle pem(BIO_new_mem_buf(room.bytes().data(), static_cast<int>(*length)));
     bool isEncrypted = false;
     KeyHandle key(PEM_read_bio_PrivateKey(pem.get(), nullptr, refusePassphrase, &isEncrypted));
     if (isEncrypted)
         return wrongFile(
-            foundation::format("The key in %@ is encrypted. Keys are taken unencrypted only.", path));
-    if (!key) return wrongFile(foundation::format("There is no private key in %@ that can be read.", path));
+            values::format("The key in %@ is encrypted. Keys are taken unencrypted only.", path));
+    if (!key) return wrongFile(values::format("There is no private key in %@ that can be read.", path));
     return key;
 }
 
@@ -54,24 +54,24 @@ struct Certificates {
 
 // One file may hold the key as well: all of it is wiped, like what OpenSSL makes of it.
 Result<Certificates> readCertificates(const std::string& path) {
-    const auto room = std::make_unique<foundation::WipedRoom<kMaximumIdentityCertificates + 1>>();
-    const auto length = foundation::readSecretFile(path, room->bytes());
+    const auto room = std::make_unique<base::WipedRoom<kMaximumIdentityCertificates + 1>>();
+    const auto length = base::readSecretFile(path, room->bytes());
     if (!length) return length.error();
     const BioHandle pem(BIO_new_mem_buf(room->bytes().data(), static_cast<int>(*length)));
     Certificates certificates{nullptr, ListHandle(sk_X509_new_null())};
     std::size_t count = 0;
     while (CertificateHandle certificate{PEM_read_bio_X509(pem.get(), nullptr, nullptr, nullptr)}) {
         if (++count > kMaximumPeerCertificates)
-            return wrongFile(foundation::format("There are more than %zu certificates in %@.",
-                                                kMaximumPeerCertificates, path));
+            return wrongFile(values::format("There are more than %zu certificates in %@.",
+                                            kMaximumPeerCertificates, path));
         if (!certificates.own)
             certificates.own = std::move(certificate);
         else if (sk_X509_push(certificates.issuers.get(), certificate.get()) > 0)
             static_cast<void>(certificate.release());  // the list owns it
     }
     if (ERR_GET_REASON(ERR_peek_last_error()) != PEM_R_NO_START_LINE)
-        return wrongFile(foundation::format("Certificate number %zu in %@ cannot be read.", count + 1, path));
-    if (!certificates.own) return wrongFile(foundation::format("There is no certificate in %@.", path));
+        return wrongFile(values::format("Certificate number %zu in %@ cannot be read.", count + 1, path));
+    if (!certificates.own) return wrongFile(values::format("There is no certificate in %@.", path));
     return certificates;
 }
 
@@ -93,13 +93,13 @@ Result<std::shared_ptr<const ClientIdentity>> ClientIdentity::read(const std::st
     auto key = readKey(keyPath);
     if (!key) return key.error();
     if (X509_check_private_key(certificates->own.get(), key->get()) != 1)
-        return wrongFile(foundation::format("The key in %@ is not that of the first certificate in %@.",
-                                            keyPath, certificatePath));
+        return wrongFile(values::format("The key in %@ is not that of the first certificate in %@.", keyPath,
+                                        certificatePath));
     auto identity = std::make_shared<ClientIdentity>();
     *identity->parts_ = {*std::move(certificates), *std::move(key)};
     const ContextHandle trial(SSL_CTX_new(TLS_client_method()));
     if (!trial || !identity->install(trial.get()))
-        return wrongFile(foundation::format(
+        return wrongFile(values::format(
             "TLS does not take the certificate in %@ with the key in %@. They may be too weak.",
             certificatePath, keyPath));
     return std::shared_ptr<const ClientIdentity>(std::move(identity));

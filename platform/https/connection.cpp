@@ -14,7 +14,7 @@
 #include <string_view>
 #include <utility>
 
-#include "foundation/handle.h"
+#include "base/handle.h"
 #include "https/transfer_error.h"
 
 namespace pinwell::https {
@@ -23,7 +23,7 @@ namespace {
 std::string partOf(CURLU* address, CURLUPart part, unsigned flags) {
     char* text = nullptr;
     if (curl_url_get(address, part, &text, flags) != CURLUE_OK) return {};
-    const foundation::Handle<char, curl_free> owner(text);
+    const base::Handle<char, curl_free> owner(text);
     return text;
 }
 
@@ -116,7 +116,7 @@ void AddressDeleter::operator()(Curl_URL* address) const noexcept {
     curl_url_cleanup(address);
 }
 
-Result<Target> targetOf(const foundation::URL& url) {
+Result<Target> targetOf(const values::URL& url) {
     const std::string text = url.absoluteString();
     const auto refuse = [&text](std::string_view why) {
         return makeError(URLErrorCode::unsupportedURL, "The URL \"" + text + "\" " + std::string(why) + ".");

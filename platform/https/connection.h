@@ -29,7 +29,7 @@ struct Target {
 
 /// Returns an error of `unsupportedURL` if the URL is not https, names a user, or names a host that the
 /// library would read as another host.
-Result<Target> targetOf(const foundation::URL& url);
+Result<Target> targetOf(const values::URL& url);
 
 /// A longer list is refused without judging. Real chains have 2 to 4.
 inline constexpr std::size_t kMaximumPeerCertificates = 16;

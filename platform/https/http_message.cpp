@@ -183,14 +183,14 @@ Result<Request> requestAfterRedirect(const Request& request, int status, const s
 
 }  // namespace pinwell::https
 
-namespace pinwell::foundation {
+namespace pinwell::values {
 
 std::string Description<https::HTTPResponse>::of(const https::HTTPResponse& response) {
-    std::string text = "{ URL: " + escapeForTerminal(response.url.absoluteString()) +
+    std::string text = "{ URL: " + base::escapeForTerminal(response.url.absoluteString()) +
                        " } { Status Code: " + std::to_string(response.status) + ", Headers { ";
     for (const auto& [name, value] : response.headers)
         text += quoteForPropertyList(name) + " = " + quoteForPropertyList(value) + "; ";
     return text + "} }";
 }
 
-}  // namespace pinwell::foundation
+}  // namespace pinwell::values

@@ -9,13 +9,13 @@
 #include <system_error>
 #include <thread>
 
-#include "foundation/process.h"
-#include "foundation/stack_guard.h"
-#include "foundation/value.h"
 #include "https/body_sink.h"
 #include "https/http_message.h"
 #include "https/transfer.h"
 #include "https/transfer_error.h"
+#include "runtime/process.h"
+#include "runtime/signals.h"
+#include "values/value.h"
 
 namespace pinwell::https {
 namespace {
@@ -24,7 +24,7 @@ namespace {
 struct ChallengeContext {
     Session& session;
     SessionDelegate& delegate;
-    foundation::SerialQueue& queue;
+    runtime::SerialQueue& queue;
     trust::TrustService& trust;
 };
 
@@ -35,7 +35,7 @@ trust::PolicyRef initialPolicy(const std::string& host) {
     trust::Policy policy;
     policy.oid = "1.3.6.1.5.5.7.3.1";  // id-kp-serverAuth, RFC 5280, section 4.2.1.12
     policy.options.emplace(option::kHostName, host);
-    policy.options.emplace(option::kPlatformAnchor, foundation::Dictionary{});
+    policy.options.emplace(option::kPlatformAnchor, values::Dictionary{});
     for (const auto check : {option::kServerAuthentication, option::kValidityDates, option::kBasicConstraints,
                              option::kNameConstraints, option::kCriticalExtensions, option::kIdLinkage})
         policy.options.emplace(check, true);
@@ -206,7 +206,7 @@ class NetworkSession : public Session {
 
   private:
     void work() {
-        const foundation::StackGuard guard;
+        const runtime::StackGuard guard;
         // A write to a closed connection must fail, not end the process.
         sigset_t signals;
         sigemptyset(&signals);
@@ -265,7 +265,7 @@ class NetworkSession : public Session {
     }
 
     URL temporaryDirectory() const {
-        return options_.temporaryDirectory ? options_.temporaryDirectory() : foundation::temporaryDirectory();
+        return options_.temporaryDirectory ? options_.temporaryDirectory() : runtime::temporaryDirectory();
     }
 
     // Follows redirects to the final response.
@@ -298,7 +298,7 @@ class NetworkSession : public Session {
     const std::shared_ptr<Inbox> inbox_ = std::make_shared<Inbox>();
     ConnectionSlot connection_;  // only for the worker
     Interrupt interrupt_;
-    foundation::SerialQueue callbacks_{"https-callbacks"};
+    runtime::SerialQueue callbacks_{"https-callbacks"};
     std::thread worker_;  // last: it uses all of the above
 };
 

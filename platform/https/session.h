@@ -17,18 +17,18 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/bytes.h"
-#include "foundation/description.h"
-#include "foundation/serial_queue.h"
-#include "foundation/url.h"
+#include "base/bytes.h"
+#include "runtime/queue.h"
 #include "trust/trust.h"
+#include "values/format.h"
+#include "values/url.h"
 
 namespace pinwell::https {
 
-using foundation::Data;
-using foundation::Error;
-using foundation::Result;
-using foundation::URL;
+using base::Data;
+using base::Error;
+using base::Result;
+using values::URL;
 
 inline constexpr int kMaximumRedirects = 10;
 inline constexpr long kIdleTimeoutSeconds = 60;
@@ -236,7 +236,7 @@ std::unique_ptr<SessionService> makeSessionService(trust::TrustService& trust, S
 
 }  // namespace pinwell::https
 
-namespace pinwell::foundation {
+namespace pinwell::values {
 
 /// <HTTPResponse: 0x...>-free and stable: { URL: ... } { Status Code: 200, Headers { ... } }
 template <>
@@ -244,4 +244,4 @@ struct Description<https::HTTPResponse> {
     static std::string of(const https::HTTPResponse& response);
 };
 
-}  // namespace pinwell::foundation
+}  // namespace pinwell::values

@@ -7,17 +7,17 @@
 #include <cstring>
 #include <system_error>
 
-#include "foundation/bytes.h"
-#include "foundation/handle.h"
-#include "foundation/value.h"
+#include "base/bytes.h"
+#include "base/handle.h"
 #include "https/http_message.h"
 #include "https/transfer_error.h"
+#include "values/value.h"
 
 namespace pinwell::https {
 namespace {
 
-using EasyHandle = foundation::Handle<CURL, curl_easy_cleanup>;
-using HeaderListHandle = foundation::Handle<curl_slist, curl_slist_free_all>;
+using EasyHandle = base::Handle<CURL, curl_easy_cleanup>;
+using HeaderListHandle = base::Handle<curl_slist, curl_slist_free_all>;
 
 // Called at the first transfer, because it costs start-up time, and most failed runs never get here.
 bool libraryIsReady() {
@@ -204,7 +204,7 @@ class Exchange {
             fail(URLErrorCode::badServerResponse, "the answer is not HTTP");
         if (allocationFailed_) fail(URLErrorCode::tooLarge, "the answer is larger than can be kept");
         if (result != CURLE_OK && !failure_) failFrom(result);
-        if (failure_) return std::move(*failure_).with(foundation::kURLKey, *request_.url);
+        if (failure_) return std::move(*failure_).withURL(request_.url->absoluteString());
 
         TransferAnswer answer{{*request_.url, head_.status(), head_.headers()}, std::nullopt};
         if (!isRedirect(answer.response)) return answer;
@@ -351,7 +351,7 @@ class Exchange {
         }
         received_ += bytes.size();
         if (isRedirect({*request_.url, head_.status(), head_.headers()})) return true;
-        const Result<void> written = sink_.write(foundation::asBytes(bytes));
+        const Result<void> written = sink_.write(base::asBytes(bytes));
         if (!written && !failure_) failure_ = written.error();
         return written.has_value();
     }

@@ -17,7 +17,7 @@
 #include <system_error>
 #include <vector>
 
-#include "foundation/file_io.h"
+#include "base/handle.h"
 #include "https/body_sink.h"
 #include "https/connection.h"
 
@@ -42,7 +42,7 @@ class Interrupt {
     int descriptor() const noexcept { return event_.get(); }
 
   private:
-    foundation::FileDescriptor event_;
+    base::FileDescriptor event_;
     std::atomic<bool> raised_ = false;
 };
 

@@ -5,6 +5,8 @@
 #include <algorithm>
 #include <array>
 
+#include "base/text.h"
+
 namespace pinwell::https {
 namespace {
 
@@ -55,8 +57,7 @@ constexpr std::array kFailures{
 }  // namespace
 
 Error makeError(URLErrorCode code, const std::string& text) {
-    return {foundation::kURLErrorDomain, static_cast<std::int64_t>(code),
-            foundation::escapeForTerminal(text)};
+    return {base::kURLErrorDomain, static_cast<std::int64_t>(code), base::escapeForTerminal(text)};
 }
 
 const TransferFailure& failureOf(int result) noexcept {

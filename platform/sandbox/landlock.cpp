@@ -10,15 +10,15 @@
 #include <cstdint>
 #include <system_error>
 
-#include "foundation/file_io.h"
+#include "base/handle.h"
 #include "sandbox/facilities.h"
 
 namespace pinwell::sandbox {
 namespace {
 
-using foundation::Error;
-using foundation::FileDescriptor;
-using foundation::Result;
+using base::Error;
+using base::FileDescriptor;
+using base::Result;
 
 // The kernel's numbers (include/uapi/linux/landlock.h). Defined here because the headers of Linux 6.1, on
 // Debian 12, lack some of them.
@@ -86,7 +86,7 @@ std::uint64_t deniedNetworkRights(int version, Network network) {
 Error lastError(const std::string& about = {}) {
     const int reason = errno;
     const std::string text = std::generic_category().message(reason);
-    return {foundation::kPOSIXErrorDomain, reason, about.empty() ? text : about + ": " + text};
+    return {base::kPOSIXErrorDomain, reason, about.empty() ? text : about + ": " + text};
 }
 
 // A rule is for one inode. Network file systems of this type may give a file a new inode at any time.
@@ -101,7 +101,7 @@ Result<void> addRule(int ruleset, const FileRule& rule, std::uint64_t known) {
     struct stat status {};
     if (!place || fstat(place.get(), &status) != 0) return {};  // it does not exist
     if (!keepsInodes(place.get()))
-        return Error(foundation::kPOSIXErrorDomain, EOPNOTSUPP,
+        return Error(base::kPOSIXErrorDomain, EOPNOTSUPP,
                      rule.path + ": the file system (9P) does not keep it");
     PathRule added;
     added.rights = (rule.access == Access::write ? kWriteRights : kReadRights) & known;
@@ -127,7 +127,7 @@ Result<void> restrictFiles(const FileRules& files, Network network) {
     const bool writes = std::any_of(files.begin(), files.end(),
                                     [](const FileRule& rule) { return rule.access == Access::write; });
     if (writes && version < kVersionWithRenames)
-        return Error(foundation::kPOSIXErrorDomain, EOPNOTSUPP,
+        return Error(base::kPOSIXErrorDomain, EOPNOTSUPP,
                      "this kernel's version of it forbids renaming files");
 
     RulesetAttributes attributes;

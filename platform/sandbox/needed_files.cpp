@@ -17,16 +17,16 @@
 #include <system_error>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/file_io.h"
-#include "foundation/process.h"
+#include "base/bytes.h"
+#include "base/file_io.h"
+#include "runtime/process.h"
 #include "sandbox/sandbox.h"
 
 namespace pinwell::sandbox {
 namespace {
 
 namespace fs = std::filesystem;
-using foundation::secureEnvironment;
+using runtime::secureEnvironment;
 
 // Far more than any real system's few lines.
 constexpr std::size_t kMaximumConfiguration = std::size_t{64} * 1024;
@@ -65,9 +65,9 @@ void addIncluded(FileRules& rules, const std::string& pattern, int depth) {
 void addLoaderConfiguration(FileRules& rules, const std::string& path, int depth) {
     constexpr int kDeepestInclude = 4;
     constexpr std::string_view kInclude = "include";
-    const auto bytes = foundation::readSmallFile(path, kMaximumConfiguration);
+    const auto bytes = base::readSmallFile(path, kMaximumConfiguration);
     if (!bytes || depth > kDeepestInclude) return;
-    const std::string contents = foundation::toString(*bytes);
+    const std::string contents = base::toString(*bytes);
     std::string_view text = contents;
     while (!text.empty()) {
         const std::size_t end = text.find('\n');
@@ -121,9 +121,9 @@ void addLoaderDirectories(FileRules& rules) {
 std::vector<std::string> hostServices(const std::string& switchFile) {
     constexpr std::string_view kHosts = "hosts:";
     std::vector<std::string> services;
-    const auto bytes = foundation::readSmallFile(switchFile, kMaximumConfiguration);
+    const auto bytes = base::readSmallFile(switchFile, kMaximumConfiguration);
     if (!bytes) return services;
-    std::istringstream lines(foundation::toString(*bytes));
+    std::istringstream lines(base::toString(*bytes));
     for (std::string line; std::getline(lines, line);) {
         line = line.substr(0, line.find('#'));
         const std::size_t start = std::min(line.find_first_not_of(kBlank), line.size());

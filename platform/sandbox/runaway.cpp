@@ -6,8 +6,8 @@
 #include <memory>
 #include <utility>
 
-#include "foundation/sanitized.h"
-#include "foundation/stack_guard.h"
+#include "runtime/process.h"
+#include "runtime/signals.h"
 #include "sandbox/sandbox.h"
 
 namespace pinwell::sandbox {
@@ -33,7 +33,7 @@ void onProcessorTime(int) {
 }
 
 void onFault(int number, siginfo_t* information, void*) {
-    if (information->si_code > 0 && foundation::StackGuard::isBeyondStack(information->si_addr))
+    if (information->si_code > 0 && runtime::StackGuard::isBeyondStack(information->si_addr))
         endWith(ending->stack);
     // Another fault: it repeats after this returns, and the process crashes as without us.
     std::signal(number, SIG_DFL);
@@ -53,7 +53,7 @@ void lower(Resource resource, rlim_t value) {
 
 std::uint64_t processorSecondsFor(std::uint64_t bytes) {
     const std::uint64_t seconds = kReadingSeconds + bytes / kBytesPerSecond;
-    return foundation::kSanitized ? seconds * kSanitizedFactor : seconds;
+    return runtime::kSanitized ? seconds * kSanitizedFactor : seconds;
 }
 
 void limitRunaways(std::uint64_t processorSeconds, RunawayEnd end) {
@@ -67,7 +67,7 @@ void limitRunaways(std::uint64_t processorSeconds, RunawayEnd end) {
     sigaction(SIGXCPU, &action, nullptr);
     lower(RLIMIT_CPU, processorSeconds);
 
-    if (foundation::kSanitized) return;
+    if (runtime::kSanitized) return;
     lower(RLIMIT_STACK, kMaximumStack);
     action.sa_sigaction = onFault;
     action.sa_flags = SA_SIGINFO | SA_ONSTACK;

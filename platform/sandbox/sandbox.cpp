@@ -6,7 +6,7 @@
 #include <iterator>
 #include <utility>
 
-#include "foundation/sanitized.h"
+#include "runtime/process.h"
 #include "sandbox/facilities.h"
 
 namespace pinwell::sandbox {
@@ -41,7 +41,7 @@ void forbidCoreDumps() {
     const rlimit none{0, 0};
     setrlimit(RLIMIT_CORE, &none);
     // The leak checker of a sanitized build traces the process at its end.
-    if (!foundation::kSanitized) prctl(PR_SET_DUMPABLE, 0, 0, 0, 0);
+    if (!runtime::kSanitized) prctl(PR_SET_DUMPABLE, 0, 0, 0, 0);
 }
 
 void append(FileRules& rules, FileRules more) {

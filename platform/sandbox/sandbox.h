@@ -118,9 +118,9 @@ struct RunawayEnd {
 };
 
 /// From now on this process ends in this way if it has used `processorSeconds` in all, or if a thread with a
-/// foundation::StackGuard exceeds its stack. The main thread's stack has at most 8 MiB. A lower limit that
+/// runtime::StackGuard exceeds its stack. The main thread's stack has at most 8 MiB. A lower limit that
 /// the caller has set stays. If the time runs out during a write, the end waits for the write
-/// (foundation::SignalDeferral). Call it before there is a second thread, and before the main thread's guard.
+/// (runtime::SignalDeferral). Call it before there is a second thread, and before the main thread's guard.
 /// Other crashes are not changed; in builds with sanitizers, stacks are not limited either.
 void limitRunaways(std::uint64_t processorSeconds, RunawayEnd end);
 

@@ -15,15 +15,15 @@
 #include <span>
 #include <system_error>
 
-#include "foundation/handle.h"
-#include "foundation/sanitized.h"
+#include "base/handle.h"
+#include "runtime/process.h"
 #include "sandbox/facilities.h"
 
 namespace pinwell::sandbox {
 namespace {
 
 // The leak checker of a sanitized build forks at the end and traces its parent; its reports start a program.
-using foundation::kSanitized;
+using runtime::kSanitized;
 
 using Names = std::span<const char* const>;
 
@@ -97,7 +97,7 @@ constexpr std::uint64_t kNameMemory = 0x53564d41;  // PR_SET_VMA, of Linux 5.17
 constexpr std::uint32_t kRefuse = SCMP_ACT_ERRNO(EPERM);
 constexpr std::uint32_t kUnknown = SCMP_ACT_ERRNO(ENOSYS);
 
-using Filter = foundation::Handle<void, seccomp_release>;
+using Filter = base::Handle<void, seccomp_release>;
 
 // Collects the rules and keeps the first failure, as an errno value.
 class Rules {
@@ -226,13 +226,13 @@ Rules readingRules(FilesAre files) {
 
 }  // namespace
 
-foundation::Result<void> restrictCalls(Calls calls, Network network, FilesAre files) {
+base::Result<void> restrictCalls(Calls calls, Network network, FilesAre files) {
     Rules rules = calls == Calls::reading ? readingRules(files) : serviceRules(network);
     const int failure = rules.load();
     if (failure == 0) return {};
     // ECANCELED is the library's code for every refusal of the kernel.
-    return foundation::Error(
-        foundation::kPOSIXErrorDomain, failure,
+    return base::Error(
+        base::kPOSIXErrorDomain, failure,
         failure == ECANCELED ? "the kernel refuses it" : std::generic_category().message(failure));
 }
 

@@ -5,6 +5,8 @@
 #include <mutex>
 #include <string>
 
+#include "base/text.h"
+
 namespace pinwell::syslog {
 namespace {
 
@@ -32,7 +34,7 @@ class HostLog final : public SystemLog {
     void error(std::string_view text) override {
         // Not every caller's text comes from format(); escaping twice changes nothing. The text is cut first,
         // so that no long text is escaped.
-        const std::string entry = cut(foundation::escapeForTerminal(text.substr(0, kLongestEntry + 1)));
+        const std::string entry = cut(base::escapeForTerminal(text.substr(0, kLongestEntry + 1)));
         const std::lock_guard lock(mutex_);
         open(0);
         ::syslog(LOG_USER | LOG_ERR, "%s", entry.c_str());

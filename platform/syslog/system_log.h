@@ -4,7 +4,7 @@
 #include <memory>
 #include <string_view>
 
-#include "foundation/format.h"
+#include "values/format.h"
 
 namespace pinwell::syslog {
 
@@ -24,9 +24,9 @@ class SystemLog {
     virtual void connect() {}
 
     template <class... Args>
-    void error(foundation::FormatString<std::type_identity_t<Args>...> format,
+    void error(values::FormatString<std::type_identity_t<Args>...> format,
                const Args&... args) requires(sizeof...(Args) > 0) {
-        error(std::string_view(foundation::format(format, args...)));
+        error(std::string_view(values::format(format, args...)));
     }
 };
 

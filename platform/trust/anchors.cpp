@@ -3,12 +3,11 @@
 #include <algorithm>
 #include <string>
 
-#include "foundation/base64.h"
-#include "foundation/bytes.h"
-#include "foundation/file_io.h"
-#include "foundation/format.h"
-#include "foundation/utf8.h"
+#include "base/bytes.h"
+#include "base/file_io.h"
+#include "base/text.h"
 #include "trust/der.h"
+#include "values/format.h"
 
 namespace pinwell::trust {
 
@@ -79,8 +78,8 @@ class BlockReader {
     static void readBody(PemBlock& block, std::string_view body) {
         std::string base64;
         std::copy_if(body.begin(), body.end(), std::back_inserter(base64),
-                     [](char c) { return !foundation::isSpace(c); });
-        block.data = foundation::decodeBase64(base64);
+                     [](char c) { return !base::isSpace(c); });
+        block.data = base::decodeBase64(base64);
         if (!block.data) block.damage = "it is not in base64";
     }
 
@@ -134,23 +133,23 @@ DenyList::DenyList(const CertificateList& certificates) {
 
 void DenyList::add(const X509CertificateRef& certificate) {
     certificates_.push_back(certificate);
-    signedParts_.insert(std::string(foundation::asText(certificate->parts().signedPart)));
-    keys_.insert(foundation::toString(certificate->subjectKey().identity));
+    signedParts_.insert(std::string(base::asText(certificate->parts().signedPart)));
+    keys_.insert(base::toString(certificate->subjectKey().identity));
     ++size_;
 }
 
 bool DenyList::addUnreadable(ByteView der) {
     const std::optional<DeniedParts> parts = findParts(der);
     if (!parts) return false;
-    signedParts_.insert(foundation::toString(parts->signedPart));
-    keys_.insert(foundation::toString(parts->key));
+    signedParts_.insert(base::toString(parts->signedPart));
+    keys_.insert(base::toString(parts->key));
     ++size_;
     return true;
 }
 
 bool DenyList::reaches(const X509Certificate& certificate) const {
-    return keys_.contains(foundation::toString(certificate.subjectKey().identity)) ||
-           signedParts_.contains(foundation::toString(certificate.parts().signedPart));
+    return keys_.contains(base::toString(certificate.subjectKey().identity)) ||
+           signedParts_.contains(base::toString(certificate.parts().signedPart));
 }
 
 namespace {
@@ -168,7 +167,7 @@ bool contains(const CertificateList& list, const X509Certificate& certificate) {
 std::optional<CertificateList> readPem(ByteView text) {
     if (text.size() > kMaximumPemFileSize) return std::nullopt;
     CertificateList certificates;
-    for (const PemBlock& block : readPemBlocks(foundation::asText(text))) {
+    for (const PemBlock& block : readPemBlocks(base::asText(text))) {
         if (!block.data) return std::nullopt;
         if (!isCertificateBlock(block)) continue;
         X509CertificateRef certificate = X509Certificate::parse(*block.data);
@@ -182,7 +181,7 @@ std::optional<CertificateList> readPem(ByteView text) {
 void readDeniedPem(ByteView text, DenyList& into, const std::function<void(const std::string&)>& report) {
     std::size_t certificates = 0;
     std::size_t damaged = 0;
-    for (const PemBlock& block : readPemBlocks(foundation::asText(text))) {
+    for (const PemBlock& block : readPemBlocks(base::asText(text))) {
         std::string_view damage = block.damage;
         if (block.data) {
             // OpenSSL's "trusted" form is a certificate with trailing data.
@@ -197,10 +196,10 @@ void readDeniedPem(ByteView text, DenyList& into, const std::function<void(const
                             : "it is no certificate";
         }
         if (++damaged <= kMaximumReports)
-            report(foundation::format("the block at line %zu: %@", block.line, std::string(damage)));
+            report(values::format("the block at line %zu: %@", block.line, std::string(damage)));
     }
     if (damaged > kMaximumReports)
-        report(foundation::format("%zu more blocks are damaged", damaged - kMaximumReports));
+        report(values::format("%zu more blocks are damaged", damaged - kMaximumReports));
     if (certificates == 0 && damaged == 0) report("not a PEM file of certificates");
 }
 
@@ -212,12 +211,11 @@ using LogError = std::function<void(std::string_view)>;
 void readFiles(const std::vector<std::string>& paths, std::size_t maximumSize, const LogError& logError,
                const std::function<void(const std::string& path, ByteView text)>& use) {
     for (const std::string& path : paths) {
-        const foundation::Result<Data> text = foundation::readSmallFile(path, maximumSize);
+        const base::Result<Data> text = base::readSmallFile(path, maximumSize);
         if (text) {
             use(path, *text);
         } else {
-            logError(
-                foundation::format("Could not read certificates. %@", text.error().localizedDescription()));
+            logError(values::format("Could not read certificates. %@", text.error().localizedDescription()));
         }
     }
 }
@@ -229,7 +227,7 @@ CertificateList loadFiles(const std::vector<std::string>& paths, const LogError&
             certificates.insert(certificates.end(), read->begin(), read->end());
         } else {
             logError(
-                foundation::format("Could not read certificates. %@: not a PEM file of certificates.", path));
+                values::format("Could not read certificates. %@: not a PEM file of certificates.", path));
         }
     });
     return certificates;
@@ -239,7 +237,7 @@ DenyList loadDenied(const std::vector<std::string>& paths, const LogError& logEr
     DenyList denied;
     readFiles(paths, kMaximumDeniedFileSize, logError, [&](const std::string& path, ByteView text) {
         readDeniedPem(text, denied, [&](const std::string& reason) {
-            logError(foundation::format("Could not read certificates. %@: %@.", path, reason));
+            logError(values::format("Could not read certificates. %@: %@.", path, reason));
         });
     });
     return denied;
@@ -247,7 +245,7 @@ DenyList loadDenied(const std::vector<std::string>& paths, const LogError& logEr
 
 }  // namespace
 
-Anchors loadAnchors(const foundation::PlatformDirectory& directory, const LogError& logError) {
+Anchors loadAnchors(const config::PlatformDirectory& directory, const LogError& logError) {
     return {loadFiles(directory.rootCertificateFiles(), logError),
             loadFiles(directory.compatibilityRootCertificateFiles(), logError),
             loadFiles(directory.userAllowedCertificateFiles(), logError),

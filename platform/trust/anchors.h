@@ -17,17 +17,17 @@
 #include <unordered_set>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/platform_directory.h"
+#include "base/bytes.h"
+#include "config/platform_directory.h"
 #include "trust/certificate.h"
 
 namespace pinwell::trust {
 
 struct PemBlock {
-    std::string_view label;                // a view into the text
-    std::size_t line = 0;                  // of its first marker, from 1
-    std::optional<foundation::Data> data;  // `nullopt` if it is damaged
-    std::string_view damage;               // why, for people; empty otherwise
+    std::string_view label;          // a view into the text
+    std::size_t line = 0;            // of its first marker, from 1
+    std::optional<base::Data> data;  // `nullopt` if it is damaged
+    std::string_view damage;         // why, for people; empty otherwise
 };
 
 /// In the order of the text. Time and memory are linear in its length.
@@ -104,7 +104,7 @@ void readDeniedPem(ByteView text, DenyList& into, const std::function<void(const
 /// The directory's current certificates. An unreadable entry named *.pem (a malformed file, a broken link or
 /// a directory) is ignored and named in one line. Each damaged block of a file in user-trust/deny is named
 /// too.
-Anchors loadAnchors(const foundation::PlatformDirectory& directory,
+Anchors loadAnchors(const config::PlatformDirectory& directory,
                     const std::function<void(std::string_view)>& logError);
 
 }  // namespace pinwell::trust

@@ -2,19 +2,19 @@
 
 #include <algorithm>
 
+#include "base/text.h"
 #include "crypto/crypto.h"
-#include "foundation/description.h"
 #include "trust/der.h"
 
 namespace pinwell::trust {
 
 namespace {
 
+using base::ByteView;
 using der::contextTag;
 using der::Cursor;
 using der::Element;
 using der::Malformed;
-using foundation::ByteView;
 
 enum Version { kVersion1 = 1, kVersion2 = 2, kVersion3 = 3 };
 
@@ -88,11 +88,11 @@ namespace {
 /// SHA-1 of the key's bits identifies a key without an identifier (RFC 5280, 4.2.1.2). Nothing relies on it
 /// for security.
 std::string keyIdentifier(ByteView subjectKey, const CertificateExtensions& extensions) {
-    if (extensions.subjectKeyIdentifier) return foundation::toHex(*extensions.subjectKeyIdentifier);
+    if (extensions.subjectKeyIdentifier) return base::toHex(*extensions.subjectKeyIdentifier);
     der::Cursor cursor(subjectKey);
     cursor.take(der::kConstructedSequence);
     const ByteView bits = der::wholeBytes(cursor.take(der::kBitString).contents);
-    return foundation::toHex(crypto::availableDigestOf(crypto::Digest::sha1, bits).value_or(Data()));
+    return base::toHex(crypto::availableDigestOf(crypto::Digest::sha1, bits).value_or(Data()));
 }
 
 }  // namespace
@@ -109,12 +109,12 @@ void X509Certificate::read() {
     const std::string text =
         subject_.summary.empty() ? keyIdentifier(parts_.subjectKey, extensions_) : subject_.summary;
     // Escaped here: every use is a text for people, and the text comes from the certificate's maker.
-    summary_ = foundation::escapeForTerminal(text);
+    summary_ = base::escapeForTerminal(text);
 }
 
 X509CertificateRef X509Certificate::parse(ByteView der) {
     if (der.size() > kMaximumCertificateSize) return nullptr;
-    const std::shared_ptr<X509Certificate> result(new X509Certificate(foundation::toData(der)));
+    const std::shared_ptr<X509Certificate> result(new X509Certificate(base::toData(der)));
     try {
         result->read();
     } catch (const der::Malformed&) {

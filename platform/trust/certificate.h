@@ -21,13 +21,13 @@
 #include <optional>
 #include <string>
 
-#include "foundation/bytes.h"
-#include "foundation/date.h"
+#include "base/bytes.h"
 #include "trust/der.h"
 #include "trust/distinguished_name.h"
 #include "trust/extensions.h"
 #include "trust/public_key.h"
 #include "trust/trust.h"
+#include "values/date.h"
 
 namespace pinwell::trust {
 
@@ -36,21 +36,21 @@ inline constexpr std::size_t kMaximumCertificateSize = 131072;
 
 /// Views into the certificate's bytes, each of the contents of an element unless said otherwise.
 struct CertificateParts {
-    foundation::ByteView signedPart;  // the whole element
-    foundation::ByteView serialNumber;
-    foundation::ByteView innerAlgorithm;
+    base::ByteView signedPart;  // the whole element
+    base::ByteView serialNumber;
+    base::ByteView innerAlgorithm;
     der::Element issuer;
-    foundation::Date notBefore;
-    foundation::Date notAfter;
+    values::Date notBefore;
+    values::Date notAfter;
     der::Element subject;
-    foundation::ByteView subjectKey;
-    std::optional<foundation::ByteView> extensions;
-    foundation::ByteView outerAlgorithm;
-    foundation::ByteView signature;  // without the count of unused bits, which is 0
+    base::ByteView subjectKey;
+    std::optional<base::ByteView> extensions;
+    base::ByteView outerAlgorithm;
+    base::ByteView signature;  // without the count of unused bits, which is 0
 };
 
 /// Throws der::Malformed unless `certificate` is exactly one certificate.
-CertificateParts readCertificateParts(foundation::ByteView certificate);
+CertificateParts readCertificateParts(base::ByteView certificate);
 
 /// All fields except the verifying key are read by the constructor; afterwards any number of threads may use
 /// it.

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "base/text.h"
 #include "crypto/crypto.h"
 #include "crypto/openssl.h"
 #include "trust/certificate.h"
@@ -29,8 +30,8 @@ std::string nameText(const der::Element& encoded) {
 }
 
 /// The magnitude of a number in two's complement.
-foundation::Data negated(foundation::ByteView number) {
-    foundation::Data result = foundation::toData(number);
+base::Data negated(base::ByteView number) {
+    base::Data result = base::toData(number);
     bool carry = true;
     for (auto byte = result.rbegin(); byte != result.rend(); ++byte) {
         *byte = ~*byte;
@@ -42,13 +43,13 @@ foundation::Data negated(foundation::ByteView number) {
 }
 
 /// The text of an INTEGER's contents, which are not empty.
-std::string serialText(foundation::ByteView number) {
+std::string serialText(base::ByteView number) {
     const bool isNegative = (number.front() & std::byte{0x80}) != std::byte{0};
-    const foundation::Data magnitude = isNegative ? negated(number) : foundation::toData(number);
+    const base::Data magnitude = isNegative ? negated(number) : base::toData(number);
     const auto first =
         std::find_if(magnitude.begin(), magnitude.end(), [](std::byte byte) { return byte != std::byte{0}; });
     if (first == magnitude.end()) return "00";
-    return (isNegative ? "-" : "") + foundation::toHex({first, magnitude.end()});
+    return (isNegative ? "-" : "") + base::toHex({first, magnitude.end()});
 }
 
 /// OpenSSL's long name of an identifier, of bounded length; the identifier itself if it has none.
@@ -85,7 +86,7 @@ void describeExtensions(const CertificateExtensions& extensions, CertificateDesc
 
 }  // namespace
 
-std::optional<CertificateDescription> describeCertificate(foundation::ByteView der) {
+std::optional<CertificateDescription> describeCertificate(base::ByteView der) {
     const X509CertificateRef certificate = X509Certificate::parse(der);
     if (certificate == nullptr) return std::nullopt;
     const crypto::ErrorQueueGuard guard;
@@ -101,10 +102,9 @@ std::optional<CertificateDescription> describeCertificate(foundation::ByteView d
     description.signatureAlgorithm = oidName(certificate->signatureAlgorithm().oid);
     description.isSelfIssued = certificate->isSelfIssued();
     describeExtensions(certificate->extensions(), description);
-    description.sha1Fingerprint =
-        crypto::availableDigestOf(crypto::Digest::sha1, der).value_or(foundation::Data());
+    description.sha1Fingerprint = crypto::availableDigestOf(crypto::Digest::sha1, der).value_or(base::Data());
     description.sha256Fingerprint =
-        crypto::availableDigestOf(crypto::Digest::sha256, der).value_or(foundation::Data());
+        crypto::availableDigestOf(crypto::Digest::sha256, der).value_or(base::Data());
     return description;
 }
 

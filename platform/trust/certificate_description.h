@@ -6,8 +6,8 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/date.h"
+#include "base/bytes.h"
+#include "values/date.h"
 
 namespace pinwell::trust {
 
@@ -23,8 +23,8 @@ struct CertificateDescription {
     std::string issuer;
     std::string summary;       // as Certificate::subjectSummary
     std::string serialNumber;  // hexadecimal, lower case, with a minus sign if negative
-    foundation::Date notBefore;
-    foundation::Date notAfter;
+    values::Date notBefore;
+    values::Date notAfter;
 
     std::string keyType;  // "EC", "RSA", OpenSSL's name for any other; empty if the key is unreadable
     int keyBits = 0;
@@ -35,13 +35,13 @@ struct CertificateDescription {
     bool isCertificateAuthority = false;
     std::vector<Extension> extensions;  // in the certificate's order
 
-    foundation::Data sha1Fingerprint;
-    foundation::Data sha256Fingerprint;
-    std::optional<foundation::Data> subjectKeyIdentifier;
-    std::optional<foundation::Data> authorityKeyIdentifier;
+    base::Data sha1Fingerprint;
+    base::Data sha256Fingerprint;
+    std::optional<base::Data> subjectKeyIdentifier;
+    std::optional<base::Data> authorityKeyIdentifier;
 };
 
 /// `nullopt` unless `der` is exactly one certificate that TrustService::parseCertificate would accept.
-std::optional<CertificateDescription> describeCertificate(foundation::ByteView der);
+std::optional<CertificateDescription> describeCertificate(base::ByteView der);
 
 }  // namespace pinwell::trust

@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::trust {
 namespace {
@@ -18,12 +18,12 @@ int identifierPreference(const X509Certificate& issuer, const X509Certificate& i
 
 std::unordered_set<std::string_view> bytesOf(const CertificateList& list) {
     std::unordered_set<std::string_view> bytes;
-    for (const X509CertificateRef& certificate : list) bytes.insert(foundation::asText(certificate->der()));
+    for (const X509CertificateRef& certificate : list) bytes.insert(base::asText(certificate->der()));
     return bytes;
 }
 
 bool contains(const std::unordered_set<std::string_view>& bytes, const X509Certificate& certificate) {
-    return bytes.contains(foundation::asText(certificate.der()));
+    return bytes.contains(base::asText(certificate.der()));
 }
 
 /// Whether the chain has the certificate, or another with its subject and key.
@@ -60,8 +60,8 @@ ChainBuilder::ChainBuilder(const CertificateList& given, const CertificateList& 
 
 void ChainBuilder::addCandidates(const CertificateList& list) {
     for (const X509CertificateRef& certificate : list) {
-        if (known_.insert(foundation::asText(certificate->der())).second)
-            candidates_[foundation::asText(certificate->subject().canonical)].push_back(certificate);
+        if (known_.insert(base::asText(certificate->der())).second)
+            candidates_[base::asText(certificate->subject().canonical)].push_back(certificate);
     }
 }
 
@@ -121,7 +121,7 @@ bool ChainBuilder::extend(CertificateList& chain, const Visit& visit) {
 
 /// Certificates with the issuer's name; the ones with a matching key identifier come first.
 CertificateList ChainBuilder::namedAs(const X509Certificate& issued) const {
-    const auto found = candidates_.find(foundation::asText(issued.issuer().canonical));
+    const auto found = candidates_.find(base::asText(issued.issuer().canonical));
     if (found == candidates_.end()) return {};
     CertificateList issuers = found->second;
     std::stable_sort(issuers.begin(), issuers.end(),

@@ -5,15 +5,15 @@
 #include <limits>
 #include <vector>
 
-#include "foundation/byte_reader.h"
+#include "base/byte_io.h"
 
 namespace pinwell::trust::der {
 
 namespace {
 
-using foundation::ByteReader;
-using foundation::ByteView;
-using foundation::ShortRead;
+using base::ByteReader;
+using base::ByteView;
+using base::ShortRead;
 
 constexpr std::uint8_t kConstructedBit = 0x20;
 constexpr std::uint8_t kLongTagNumber = 0x1F;  // also the mask of the short form
@@ -100,7 +100,7 @@ bool isNestedDefinite(ByteView bytes, unsigned depth) {
 
 namespace {
 
-using foundation::Date;
+using values::Date;
 
 constexpr std::byte kSignBit{0x80};
 constexpr std::uint8_t kMoreDigits = 0x80;  // of an arc's base-128 digits

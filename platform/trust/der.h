@@ -25,8 +25,8 @@
 #include <string_view>
 #include <utility>
 
-#include "foundation/bytes.h"
-#include "foundation/date.h"
+#include "base/bytes.h"
+#include "values/date.h"
 
 namespace pinwell::trust::der {
 
@@ -49,22 +49,22 @@ inline constexpr unsigned kMaximumNesting = 32;
 /// One element at the start of a byte range.
 struct Element {
     Tag tag;
-    foundation::ByteView whole;  // tag, length and contents
-    foundation::ByteView contents;
+    base::ByteView whole;  // tag, length and contents
+    base::ByteView contents;
 };
 
 /// The tag at the start of `bytes` and its size in bytes; `nullopt` if it is truncated, or its number is not
 /// minimal or does not fit 32 bits.
-std::optional<std::pair<Tag, std::size_t>> readTag(foundation::ByteView bytes);
+std::optional<std::pair<Tag, std::size_t>> readTag(base::ByteView bytes);
 
 /// Tag and definite length at the start of `bytes`; `nullopt` if either is unreadable, the length is
 /// indefinite or not minimally encoded, or the contents reach past the end. Never reads past the end.
-std::optional<Element> readElement(foundation::ByteView bytes);
+std::optional<Element> readElement(base::ByteView bytes);
 
 /// Whether the bytes are elements end to end, also inside every constructed element, with at most
 /// `depth` levels. So a certificate that passes has no indefinite length, which OpenSSL would
 /// accept.
-bool isNestedDefinite(foundation::ByteView bytes, unsigned depth = kMaximumNesting);
+bool isNestedDefinite(base::ByteView bytes, unsigned depth = kMaximumNesting);
 
 /// Longer object identifiers are refused. RFC 5280, appendix B, requires readers to accept 100 bytes of the
 /// dotted form, which is longer than the contents.
@@ -90,32 +90,32 @@ class Malformed : public std::runtime_error {
 };
 
 /// The contents of an INTEGER in two's complement; throws Malformed unless they have the fewest bytes.
-void checkInteger(foundation::ByteView contents);
+void checkInteger(base::ByteView contents);
 
 /// The magnitude of an INTEGER's contents without leading zero bytes, empty for 0; throws Malformed if the
 /// number is negative, or not in the fewest bytes.
-foundation::ByteView naturalNumber(foundation::ByteView contents);
+base::ByteView naturalNumber(base::ByteView contents);
 
 /// The bytes of a BIT STRING's contents; throws Malformed unless the unused bits are zero.
-foundation::ByteView bitString(foundation::ByteView contents);
+base::ByteView bitString(base::ByteView contents);
 
 /// The bytes of a BIT STRING without unused bits; throws Malformed for any other.
-foundation::ByteView wholeBytes(foundation::ByteView contents);
+base::ByteView wholeBytes(base::ByteView contents);
 
 /// The dotted form of an object identifier's contents; throws Malformed.
-std::string dottedOid(foundation::ByteView contents);
+std::string dottedOid(base::ByteView contents);
 
 /// Throws Malformed for any form except the two at the top of this file, and for an invalid date.
-foundation::Date readTime(const Element& element);
+values::Date readTime(const Element& element);
 
 /// A forward cursor over elements end to end. It owns nothing. If a read throws Malformed, the cursor has not
 /// moved.
 class Cursor {
   public:
-    explicit Cursor(foundation::ByteView bytes) noexcept : rest_(bytes) {}
+    explicit Cursor(base::ByteView bytes) noexcept : rest_(bytes) {}
 
     bool atEnd() const noexcept { return rest_.empty(); }
-    foundation::ByteView rest() const noexcept { return rest_; }
+    base::ByteView rest() const noexcept { return rest_; }
 
     Element any();
     Element take(Tag tag);
@@ -129,10 +129,10 @@ class Cursor {
 
     bool boolean();
     std::string oid() { return dottedOid(take(kOid).contents); }
-    foundation::ByteView naturalNumber() { return der::naturalNumber(take(kInteger).contents); }
+    base::ByteView naturalNumber() { return der::naturalNumber(take(kInteger).contents); }
 
   private:
-    foundation::ByteView rest_;
+    base::ByteView rest_;
 };
 
 }  // namespace pinwell::trust::der

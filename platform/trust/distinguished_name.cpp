@@ -5,21 +5,20 @@
 #include <optional>
 #include <vector>
 
-#include "foundation/byte_reader.h"
-#include "foundation/byte_writer.h"
-#include "foundation/utf8.h"
+#include "base/byte_io.h"
+#include "base/text.h"
 #include "trust/der.h"
 
 namespace pinwell::trust {
 namespace {
 
+using base::ByteReader;
+using base::ByteView;
+using base::ByteWriter;
+using base::Data;
 using der::Cursor;
 using der::Element;
 using der::Malformed;
-using foundation::ByteReader;
-using foundation::ByteView;
-using foundation::ByteWriter;
-using foundation::Data;
 
 constexpr std::string_view kCommonNameOid = "2.5.4.3";
 
@@ -81,8 +80,8 @@ std::optional<std::string> readText(const Element& value) {
     if (value.tag.tagClass != der::TagClass::universal || value.tag.constructed) return std::nullopt;
     switch (value.tag.number) {
         case kUtf8String: {
-            std::string text = foundation::toString(value.contents);
-            if (!foundation::isUTF8(text)) throw Malformed("a name is not in UTF-8");
+            std::string text = base::toString(value.contents);
+            if (!base::isUTF8(text)) throw Malformed("a name is not in UTF-8");
             return text;
         }
         case kPrintableString:
@@ -104,7 +103,7 @@ std::optional<std::string> readText(const Element& value) {
 std::string fold(const std::string& text) {
     std::string folded;
     for (const char c : text) {
-        if (foundation::isSpace(c)) {
+        if (base::isSpace(c)) {
             if (!folded.empty() && folded.back() != ' ') folded.push_back(' ');
         } else {
             folded.push_back(c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c);
@@ -145,10 +144,10 @@ class NameReader {
         std::optional<std::string> text = readText(value);
 
         ByteWriter canonical;
-        appendCounted(canonical, foundation::asBytes(oid));
+        appendCounted(canonical, base::asBytes(oid));
         canonical.u8(text ? 1 : 0);
         if (text) {
-            appendCounted(canonical, foundation::asBytes(fold(*text)));
+            appendCounted(canonical, base::asBytes(fold(*text)));
         } else {
             appendCounted(canonical, value.whole);
         }

@@ -11,7 +11,7 @@
 
 #include <string>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::trust {
 
@@ -22,7 +22,7 @@ struct DistinguishedName {
     /// Equal for names that compare equal (RFC 5280, 7.1). The type of a text, the case of ASCII letters and
     /// the number of spaces do not matter; the order of the parts does. Other values are compared byte for
     /// byte.
-    foundation::Data canonical;
+    base::Data canonical;
 
     /// The last common name, otherwise the last attribute, in UTF-8; empty if there is none or it is not
     /// text.
@@ -32,6 +32,6 @@ struct DistinguishedName {
 };
 
 /// `contents` are the contents of the outer SEQUENCE. Throws der::Malformed.
-DistinguishedName readName(foundation::ByteView contents);
+DistinguishedName readName(base::ByteView contents);
 
 }  // namespace pinwell::trust

@@ -9,11 +9,11 @@
 namespace pinwell::trust {
 namespace {
 
+using base::ByteView;
+using base::Data;
 using der::Cursor;
 using der::Element;
 using der::Malformed;
-using foundation::ByteView;
-using foundation::Data;
 
 constexpr std::string_view kSubjectKeyIdentifierOid = "2.5.29.14";
 constexpr std::string_view kKeyUsageOid = "2.5.29.15";
@@ -81,11 +81,11 @@ void readAlternativeNames(ByteView value, CertificateExtensions& into) {
     for (Cursor list = enterSequence(value); !list.atEnd();) {
         const GeneralName name = readGeneralName(list.any());
         if (name.form == GeneralNameForm::dnsName) {
-            names.dnsNames.push_back(foundation::toString(name.contents));
+            names.dnsNames.push_back(base::toString(name.contents));
         } else if (name.form == GeneralNameForm::address) {
             if (name.contents.size() != 4 && name.contents.size() != 16)
                 throw Malformed("an address is of no known length");
-            names.addresses.push_back(foundation::toData(name.contents));
+            names.addresses.push_back(base::toData(name.contents));
         }
     }
     into.alternativeNames = std::move(names);
@@ -111,7 +111,7 @@ void readSubjectKeyIdentifier(ByteView value, CertificateExtensions& into) {
     Cursor outer(value);
     const ByteView identifier = outer.take(der::kOctetString).contents;
     outer.expectEnd();
-    into.subjectKeyIdentifier = foundation::toData(identifier);
+    into.subjectKeyIdentifier = base::toData(identifier);
 }
 
 void readAuthorityKeyIdentifier(ByteView value, CertificateExtensions& into) {
@@ -124,7 +124,7 @@ void readAuthorityKeyIdentifier(ByteView value, CertificateExtensions& into) {
         for (Cursor names(issuer->contents); !names.atEnd();) readGeneralName(names.any());
     }
     if (serial) der::checkInteger(serial->contents);
-    if (identifier) into.authorityKeyIdentifier = foundation::toData(identifier->contents);
+    if (identifier) into.authorityKeyIdentifier = base::toData(identifier->contents);
 }
 
 struct Reader {

@@ -21,7 +21,7 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "trust/name_constraints.h"
 
 namespace pinwell::trust {
@@ -62,8 +62,8 @@ struct CertificateExtensions {
     std::optional<Purposes> purposes;                // a malformed one names nothing
     std::optional<NameConstraints> nameConstraints;  // a malformed one permits nothing
     std::optional<AlternativeNames> alternativeNames;
-    std::optional<foundation::Data> subjectKeyIdentifier;
-    std::optional<foundation::Data> authorityKeyIdentifier;
+    std::optional<base::Data> subjectKeyIdentifier;
+    std::optional<base::Data> authorityKeyIdentifier;
 
     bool carries(std::string_view oid) const;
 };
@@ -76,6 +76,6 @@ bool isUnderstoodExtension(std::string_view oid, bool appliesNameConstraints);
 
 /// `contents` are the contents of the SEQUENCE. Throws der::Malformed if it is not a list of extensions, is
 /// empty, or has too many.
-CertificateExtensions readExtensions(foundation::ByteView contents);
+CertificateExtensions readExtensions(base::ByteView contents);
 
 }  // namespace pinwell::trust

@@ -52,7 +52,7 @@ GeneralName readGeneralName(const der::Element& element) {
 
 namespace {
 
-using foundation::Data;
+using base::Data;
 
 constexpr std::size_t kMaximumName = 253;
 constexpr std::size_t kMaximumLabel = 63;
@@ -60,7 +60,7 @@ constexpr std::size_t kMaximumLabel = 63;
 std::optional<Data> parseAddress(int family, std::size_t size, const std::string& text) {
     std::array<std::byte, 16> address{};
     if (inet_pton(family, text.c_str(), address.data()) != 1) return std::nullopt;
-    return foundation::toData(foundation::ByteView(address).first(size));
+    return base::toData(base::ByteView(address).first(size));
 }
 
 /// Unlike the C library's function, independent of the locale.

@@ -12,21 +12,21 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "trust/der.h"
 
 namespace pinwell::trust {
 
 struct AlternativeNames {
-    std::vector<std::string> dnsNames;        // as written; any 7-bit text
-    std::vector<foundation::Data> addresses;  // 4 or 16 bytes, network order
+    std::vector<std::string> dnsNames;  // as written; any 7-bit text
+    std::vector<base::Data> addresses;  // 4 or 16 bytes, network order
 };
 
 enum class GeneralNameForm { dnsName, address, other };
 
 struct GeneralName {
     GeneralNameForm form = GeneralNameForm::other;
-    foundation::ByteView contents;
+    base::ByteView contents;
 };
 
 /// Throws der::Malformed for an unknown tag, and for text that is not 7-bit.
@@ -49,6 +49,6 @@ bool isDnsName(std::string_view name);
 bool equalNames(std::string_view a, std::string_view b);
 
 /// 4 or 16 bytes in network order; an IPv6 address may be in brackets. `nullopt` if it is not an address.
-std::optional<foundation::Data> parseAddress(std::string_view host);
+std::optional<base::Data> parseAddress(std::string_view host);
 
 }  // namespace pinwell::trust

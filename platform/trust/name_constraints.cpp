@@ -7,11 +7,11 @@
 namespace pinwell::trust {
 namespace {
 
+using base::ByteView;
+using base::Data;
 using der::Cursor;
 using der::Element;
 using der::Malformed;
-using foundation::ByteView;
-using foundation::Data;
 
 bool isSubtree(std::string_view name) {
     if (name.starts_with('.'))
@@ -39,7 +39,7 @@ NameSubtrees::AddressRange readRange(ByteView contents) {
     const ByteView address = contents.first(contents.size() / 2);
     const ByteView mask = contents.subspan(contents.size() / 2);
     if (!isMask(mask)) throw Malformed("a mask is not a number of ones and then zeros");
-    return {foundation::toData(address), foundation::toData(mask)};
+    return {base::toData(address), base::toData(mask)};
 }
 
 NameSubtrees readSubtrees(Cursor list, NameConstraints& whole) {
@@ -50,7 +50,7 @@ NameSubtrees readSubtrees(Cursor list, NameConstraints& whole) {
         subtree.expectEnd();
         switch (base.form) {
             case GeneralNameForm::dnsName:
-                subtrees.dnsNames.push_back(foundation::toString(base.contents));
+                subtrees.dnsNames.push_back(base::toString(base.contents));
                 if (!isSubtree(subtrees.dnsNames.back())) throw Malformed("a subtree is no DNS name");
                 break;
             case GeneralNameForm::address:

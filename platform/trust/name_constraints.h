@@ -16,15 +16,15 @@
 #include <utility>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "trust/general_name.h"
 
 namespace pinwell::trust {
 
 struct NameSubtrees {
     struct AddressRange {
-        foundation::Data address;  // 4 or 16 bytes, the bits outside the mask zero
-        foundation::Data mask;
+        base::Data address;  // 4 or 16 bytes, the bits outside the mask zero
+        base::Data mask;
     };
 
     std::vector<std::string> dnsNames;
@@ -40,7 +40,7 @@ struct NameConstraints {
 };
 
 /// From the value of the extension. Throws der::Malformed.
-NameConstraints readNameConstraints(foundation::ByteView value);
+NameConstraints readNameConstraints(base::ByteView value);
 
 /// Maximum comparisons of a name with a subtree in one evaluation. Real chains need fewer than 1,000; one
 /// malicious chain could need 10^9.

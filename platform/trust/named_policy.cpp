@@ -6,13 +6,13 @@
 #include <memory>
 #include <optional>
 
-#include "foundation/value.h"
 #include "trust/include/pinwell/ostrel_security.h"
+#include "values/value.h"
 
 namespace pinwell::trust {
 namespace {
 
-using foundation::Value;
+using values::Value;
 
 struct LibraryCloser {
     void operator()(void* library) const noexcept { dlclose(library); }

@@ -2,14 +2,14 @@
 
 #include <algorithm>
 
-#include "foundation/date.h"
-#include "foundation/format.h"
 #include "trust/general_name.h"
+#include "values/date.h"
+#include "values/format.h"
 
 namespace pinwell::trust {
 namespace {
 
-using foundation::format;
+using values::format;
 
 /// Collects the faults of one chain.
 class Examination {

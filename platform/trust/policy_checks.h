@@ -7,7 +7,7 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/error.h"
+#include "base/error.h"
 #include "trust/chain_builder.h"
 #include "trust/trust.h"
 
@@ -36,7 +36,7 @@ struct Requirements {
 
 /// An unknown option, or a value of another type, is an error that names it: nothing may pass a policy that
 /// is not fully understood.
-foundation::Result<Requirements> readRequirements(const Dictionary& options);
+base::Result<Requirements> readRequirements(const Dictionary& options);
 
 /// One fault, and its certificate.
 struct Failure {

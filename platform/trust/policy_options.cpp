@@ -2,17 +2,17 @@
 #include <algorithm>
 #include <array>
 
-#include "foundation/format.h"
-#include "foundation/value.h"
 #include "trust/policy_checks.h"
 #include "trust/trust.h"
+#include "values/format.h"
+#include "values/value.h"
 
 namespace pinwell::trust {
 
 namespace {
 
-using foundation::Result;
-using foundation::Value;
+using base::Result;
+using values::Value;
 
 /// Each reader returns whether the value has the option's type.
 bool readSwitch(const Value& value, bool& into) {
@@ -101,7 +101,7 @@ constexpr std::array kRequirementReaders{
 };
 
 Error refusal(std::string text) {
-    return {foundation::kOSStatusErrorDomain, kParameterError, std::move(text)};
+    return {base::kOSStatusErrorDomain, kParameterError, std::move(text)};
 }
 
 }  // namespace
@@ -113,9 +113,9 @@ Result<Requirements> readRequirements(const Dictionary& options) {
             std::find_if(kRequirementReaders.begin(), kRequirementReaders.end(),
                          [&wanted = key](const OptionReader& entry) { return entry.key == wanted; });
         if (reader == kRequirementReaders.end())
-            return refusal(foundation::format("the policy option %@ is not known", key));
+            return refusal(values::format("the policy option %@ is not known", key));
         if (!reader->read(value, requirements)) {
-            return refusal(foundation::format("the policy option %@ has a value of the wrong type", key));
+            return refusal(values::format("the policy option %@ has a value of the wrong type", key));
         }
     }
     // Both anchor options together: each must hold, and the platform's own anchors are in both sets.

@@ -6,8 +6,8 @@
 
 #include <algorithm>
 
+#include "base/byte_io.h"
 #include "crypto/openssl.h"
-#include "foundation/byte_reader.h"
 #include "trust/der.h"
 
 namespace pinwell::trust {
@@ -26,7 +26,7 @@ constexpr std::size_t kLongestInteger = 67;  // the order of P-521 has 66 bytes,
 bool isPositiveInteger(const der::Element& element) {
     if (element.tag != der::kInteger || element.contents.empty() || element.contents.size() > kLongestInteger)
         return false;
-    foundation::ByteReader reader(element.contents);
+    base::ByteReader reader(element.contents);
     const std::uint8_t first = reader.u8("integer");
     if (first != 0) return (first & kSignBit) == 0;
     return !reader.atEnd() && (reader.u8("integer") & kSignBit) != 0;  // or zero, or not the shortest form

@@ -8,10 +8,10 @@
 namespace pinwell::trust {
 namespace {
 
+using base::ByteView;
 using der::Cursor;
 using der::Element;
 using der::Malformed;
-using foundation::ByteView;
 using Scheme = SignatureAlgorithm::Scheme;
 
 constexpr Digest kMd5{"MD5", false};

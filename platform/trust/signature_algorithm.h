@@ -16,7 +16,7 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::trust {
 
@@ -53,9 +53,9 @@ struct SignatureAlgorithm {
 
 /// `contents` are the contents of the SEQUENCE. Parameters of another algorithm make it unknown. Throws
 /// der::Malformed if it has no identifier or bytes are left over.
-SignatureAlgorithm readSignatureAlgorithm(foundation::ByteView contents);
+SignatureAlgorithm readSignatureAlgorithm(base::ByteView contents);
 
 /// From the contents of the SEQUENCE of RSASSA-PSS's parameters. Throws der::Malformed.
-PssParameters readPssParameters(foundation::ByteView contents);
+PssParameters readPssParameters(base::ByteView contents);
 
 }  // namespace pinwell::trust

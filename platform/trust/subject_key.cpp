@@ -4,21 +4,20 @@
 #include <array>
 #include <bit>
 
-#include "foundation/byte_reader.h"
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 #include "trust/der.h"
 
 namespace pinwell::trust {
 namespace {
 
+using base::ByteReader;
+using base::ByteView;
+using base::ByteWriter;
+using base::Data;
+using base::ShortRead;
 using der::Cursor;
 using der::Element;
 using der::Malformed;
-using foundation::ByteReader;
-using foundation::ByteView;
-using foundation::ByteWriter;
-using foundation::Data;
-using foundation::ShortRead;
 
 constexpr std::string_view kRsaOid = "1.2.840.113549.1.1.1";
 constexpr std::string_view kEllipticCurveOid = "1.2.840.10045.2.1";
@@ -135,8 +134,8 @@ void readRsa(ByteView bytes, SubjectKey& key) {
     if (bitLength(modulus) <= bitLength(exponent)) return;
     key.kind = SubjectKey::Kind::rsa;
     key.bits = bitLength(modulus);
-    key.modulus = foundation::toData(modulus);
-    key.exponent = foundation::toData(exponent);
+    key.modulus = base::toData(modulus);
+    key.exponent = base::toData(exponent);
 }
 
 void readEllipticCurve(ByteView parameters, ByteView point, SubjectKey& key) {
@@ -154,7 +153,7 @@ void readEllipticCurve(ByteView parameters, ByteView point, SubjectKey& key) {
     key.kind = SubjectKey::Kind::ellipticCurve;
     key.bits = curve->bits;
     key.curve = curve->name;
-    key.point = foundation::toData(point);
+    key.point = base::toData(point);
 }
 
 void readEdwards(ByteView parameters, ByteView point, SubjectKey::Kind kind, SubjectKey& key) {
@@ -162,7 +161,7 @@ void readEdwards(ByteView parameters, ByteView point, SubjectKey::Kind kind, Sub
     if (!parameters.empty() || point.size() != size) return;
     key.kind = kind;
     key.bits = kind == SubjectKey::Kind::ed25519 ? 253 : 456;
-    key.point = foundation::toData(point);
+    key.point = base::toData(point);
 }
 
 void readKnown(ByteView parameters, ByteView bits, SubjectKey& key) {

@@ -19,7 +19,7 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "trust/signature_algorithm.h"
 
 namespace pinwell::trust {
@@ -39,9 +39,9 @@ struct SubjectKey {
     std::string algorithm;   // dotted
     std::string_view curve;  // OpenSSL's name; of an elliptic-curve key alone
 
-    foundation::Data modulus;   // for RSA, big-endian, the first byte not zero
-    foundation::Data exponent;  // the same
-    foundation::Data point;     // for other kinds, as written
+    base::Data modulus;   // for RSA, big-endian, the first byte not zero
+    base::Data exponent;  // the same
+    base::Data point;     // for other kinds, as written
 
     /// The required parameters of every signature; only for a PSS key with parameters.
     std::optional<PssParameters> pssOnly;
@@ -50,15 +50,15 @@ struct SubjectKey {
     /// The identity of the key: its modulus and exponent, or its point (x, and whether y is odd). It is the
     /// same for every algorithm, parameters and form of the point, even for ones that this reader does not
     /// accept.
-    foundation::Data identity;
+    base::Data identity;
 };
 
 /// `contents` are the contents of the outer SEQUENCE. Throws der::Malformed if they do not have the structure
 /// above; a key that cannot be used is `unusable`.
-SubjectKey readSubjectKey(foundation::ByteView contents);
+SubjectKey readSubjectKey(base::ByteView contents);
 
 /// Only the identity, from the contents of a SEQUENCE of which only the two elements need to be well-formed.
 /// `nullopt` if they are missing.
-std::optional<foundation::Data> readKeyIdentity(foundation::ByteView contents);
+std::optional<base::Data> readKeyIdentity(base::ByteView contents);
 
 }  // namespace pinwell::trust

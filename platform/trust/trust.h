@@ -13,26 +13,26 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/date.h"
-#include "foundation/error.h"
-#include "foundation/platform_directory.h"
-#include "foundation/value.h"
+#include "base/bytes.h"
+#include "base/error.h"
+#include "config/platform_directory.h"
+#include "values/date.h"
+#include "values/value.h"
 
 namespace pinwell::trust {
 
-using foundation::Array;
-using foundation::ByteView;
-using foundation::Data;
-using foundation::Date;
-using foundation::Dictionary;
-using foundation::Error;
-using foundation::Result;
+using base::ByteView;
+using base::Data;
+using base::Error;
+using base::Result;
+using values::Array;
+using values::Date;
+using values::Dictionary;
 
 /// A platform status; 0 is success.
 using Status = std::int32_t;
 inline constexpr Status kSuccess = 0;
-using foundation::kParameterError;                 // -50
+using base::kParameterError;                       // -50
 inline constexpr Status kSignatureError = -67688;  // a signature did not verify
 
 /// Verdict numbers of an evaluation.
@@ -165,7 +165,7 @@ class TrustService {
 
 /// The service over the platform directory's anchors, read once on first need. `now` is the evaluation time.
 /// An unreadable PEM file is ignored; `logError` is called once, with one line that names it.
-std::unique_ptr<TrustService> makeTrustService(foundation::PlatformDirectory directory,
+std::unique_ptr<TrustService> makeTrustService(config::PlatformDirectory directory,
                                                std::function<void(std::string_view)> logError,
                                                std::function<Date()> now = Date::now);
 

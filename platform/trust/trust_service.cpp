@@ -4,10 +4,10 @@
 #include <array>
 #include <mutex>
 
-#include "foundation/format.h"
 #include "trust/chain_builder.h"
 #include "trust/policy_checks.h"
 #include "trust/public_key.h"
+#include "values/format.h"
 
 namespace pinwell::trust {
 namespace {
@@ -143,12 +143,12 @@ class ChainTrust final : public Trust {
     }
 
     std::optional<std::string> failureDescription() const override {
-        if (policyError_) return foundation::format("Policy %@: %@", policy_->oid, *policyError_);
+        if (policyError_) return values::format("Policy %@: %@", policy_->oid, *policyError_);
         if (!judgement_ || judgement_->failures.empty()) return std::nullopt;
         const Failure& failure = judgement_->failures.front();
-        return foundation::format("Certificate \"%@\": %@",
-                                  judgement_->chain.certificates[failure.certificate]->subjectSummary(),
-                                  failure.reason);
+        return values::format("Certificate \"%@\": %@",
+                              judgement_->chain.certificates[failure.certificate]->subjectSummary(),
+                              failure.reason);
     }
 
     PublicKeyRef publicKey() const override {
@@ -215,7 +215,7 @@ class X509TrustService final : public TrustService {
         const auto* const ours = dynamic_cast<const X509PublicKey*>(&key);
         if (ours == nullptr) return Error::osStatus(kParameterError);
         if (verifyEcdsa(*ours, message, signature)) return {};
-        return Error(foundation::kOSStatusErrorDomain, kSignatureError, "The signature does not verify.");
+        return Error(base::kOSStatusErrorDomain, kSignatureError, "The signature does not verify.");
     }
 
   private:
@@ -232,7 +232,7 @@ std::unique_ptr<TrustService> makeTrustService(std::function<Anchors()> loadAnch
         std::make_shared<Environment>(std::move(loadAnchors), std::move(now)), std::move(securityLibrary));
 }
 
-std::unique_ptr<TrustService> makeTrustService(foundation::PlatformDirectory directory,
+std::unique_ptr<TrustService> makeTrustService(config::PlatformDirectory directory,
                                                std::function<void(std::string_view)> logError,
                                                std::function<Date()> now) {
     return makeTrustService([directory = std::move(directory),

@@ -6,9 +6,9 @@
 #include <memory>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/file_io.h"
-#include "foundation/lazy_library.h"
+#include "base/bytes.h"
+#include "base/file_io.h"
+#include "runtime/process.h"
 
 namespace pinwell::types {
 namespace {
@@ -19,7 +19,7 @@ constexpr std::size_t kLargestDescription = 256 * 1024;
 // The library's functions, found at the first extension that this platform does not declare itself.
 struct Gio {
     Gio() {
-        foundation::LazyLibrary library("libgio-2.0.so.0");
+        runtime::LazyLibrary library("libgio-2.0.so.0");
         library.find(contentTypeGuess, "g_content_type_guess");
         library.find(contentTypeIsUnknown, "g_content_type_is_unknown");
         library.find(freeText, "g_free");
@@ -88,8 +88,8 @@ struct CommentReader {
     }
 };
 
-std::string untranslatedComment(foundation::ByteView document) {
-    const std::string text = foundation::toString(document);
+std::string untranslatedComment(base::ByteView document) {
+    const std::string text = base::toString(document);
     const GMarkupParser parser{CommentReader::startElement, CommentReader::endElement, CommentReader::text,
                                nullptr, nullptr};
     CommentReader reader;
@@ -128,7 +128,7 @@ std::optional<std::string> mimeDescription(const std::string& mimeType) {
     if (!isWellFormed(mimeType) || !gio().isThere) return std::nullopt;
     for (const std::string& directory : dataDirectories()) {
         const auto document =
-            foundation::readSmallFile(directory + "/mime/" + mimeType + ".xml", kLargestDescription);
+            base::readSmallFile(directory + "/mime/" + mimeType + ".xml", kLargestDescription);
         if (!document) continue;
         if (std::string comment = untranslatedComment(*document); !comment.empty()) return comment;
     }

@@ -4,9 +4,10 @@
 #include <array>
 #include <optional>
 
-#include "foundation/bytes.h"
-#include "foundation/url.h"
+#include "base/bytes.h"
+#include "base/text.h"
 #include "types/mime_database.h"
+#include "values/url.h"
 
 namespace pinwell::types {
 namespace {
@@ -107,7 +108,7 @@ constexpr std::string_view kPublicPrefix = "public.";
 constexpr std::string_view kPublicDirectoryPrefix = "public.directory.";
 
 std::string lowerCaseExtension(std::string_view name) {
-    std::string extension(foundation::pathExtensionOfName(name));
+    std::string extension(values::pathExtensionOfName(name));
     for (char& c : extension)
         if (c >= 'A' && c <= 'Z') c = static_cast<char>(c - 'A' + 'a');
     return extension;
@@ -151,7 +152,7 @@ class Service final : public TypeService {
             return std::string(declared);
         if (auto mimeType = mimeTypeFor(extension))
             return identifierForMIMEType(std::move(*mimeType), item.kind);
-        return std::string(kDynamicPrefix) + foundation::toHex(foundation::asBytes(extension));
+        return std::string(kDynamicPrefix) + base::toHex(base::asBytes(extension));
     }
 
     std::string localizedDescription(const Item& item) const override {

@@ -17,8 +17,9 @@
 #include <utility>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/file_io.h"
+#include "base/bytes.h"
+#include "base/file_io.h"
+#include "base/handle.h"
 #include "xar/header.h"
 #include "xar/inflater.h"
 #include "xar/table_of_contents.h"
@@ -26,7 +27,7 @@
 namespace pinwell::xar {
 namespace {
 
-using foundation::Data;
+using base::Data;
 
 constexpr std::size_t kDigestedAtOnce = std::size_t{64} * 1024;
 
@@ -68,22 +69,22 @@ class Archive {
 
     /// The checksum of the table of contents, computed and compared with the heap by open(). Empty for an
     /// archive without an algorithm, which has no signatures.
-    const foundation::Data& checksum() const noexcept { return checksum_; }
+    const base::Data& checksum() const noexcept { return checksum_; }
 
   private:
     Archive() = default;
 
     bool openFile(const std::string& path);
-    std::optional<foundation::Data> read(std::uint64_t offset, std::size_t length) const;
+    std::optional<base::Data> read(std::uint64_t offset, std::size_t length) const;
     bool readTable(const Header& header);
     bool isChecksumDescribed(std::optional<Digest> digest) const;
     bool isChecksumStored() const;
 
-    foundation::FileDescriptor file_;
+    base::FileDescriptor file_;
     std::uint64_t fileSize_ = 0;
     std::uint64_t heapStart_ = 0;
     TableOfContents table_;
-    foundation::Data checksum_;
+    base::Data checksum_;
 };
 
 std::unique_ptr<Archive> Archive::open(const std::string& path) {
@@ -99,7 +100,7 @@ std::unique_ptr<Archive> Archive::open(const std::string& path) {
 }
 
 bool Archive::openFile(const std::string& path) {
-    auto file = foundation::openRegularFile(path, O_RDONLY);
+    auto file = base::openRegularFile(path, O_RDONLY);
     if (!file) return false;
     file_ = std::move(file->descriptor);
     fileSize_ = static_cast<std::uint64_t>(file->status.st_size);
@@ -126,8 +127,7 @@ bool Archive::readTable(const Header& header) {
     if (header.compressedLength > kMaximumTableOfContents) return false;
 
     TableOfContentsReader reader;
-    Inflater inflater(kMaximumTableOfContents,
-                      [&](foundation::ByteView bytes) { return reader.feed(bytes); });
+    Inflater inflater(kMaximumTableOfContents, [&](base::ByteView bytes) { return reader.feed(bytes); });
     std::optional<crypto::Hasher> hasher;
     if (header.digest) hasher.emplace(*header.digest);
     std::uint64_t at = header.size;
@@ -142,7 +142,7 @@ bool Archive::readTable(const Header& header) {
     auto table = inflater.complete() ? reader.finish() : std::nullopt;
     if (!table) return false;
     table_ = *std::move(table);
-    if (hasher) checksum_ = foundation::toData(hasher->finish());
+    if (hasher) checksum_ = base::toData(hasher->finish());
     heapStart_ = at;
     return true;
 }

@@ -4,13 +4,13 @@
 #include <array>
 #include <string>
 
-#include "foundation/byte_reader.h"
+#include "base/byte_io.h"
 
 namespace pinwell::xar {
 namespace {
 
-using foundation::ByteReader;
-using foundation::ShortRead;
+using base::ByteReader;
+using base::ShortRead;
 
 constexpr std::uint32_t kMagic = 0x78617221;  // "xar!"
 constexpr std::size_t kSmallestNamingHeader = 32;
@@ -30,7 +30,7 @@ constexpr std::array kNames{
 std::optional<Digest> namedDigest(ByteReader& reader, std::size_t headerSize) {
     if (headerSize < kSmallestNamingHeader || headerSize % kNamingHeaderUnit != 0) return std::nullopt;
     const std::uint64_t room = std::min(headerSize, kLongestHeaderRead) - kFixedHeaderSize;
-    std::string name = foundation::toString(reader.bytes(room, "checksum algorithm's name"));
+    std::string name = base::toString(reader.bytes(room, "checksum algorithm's name"));
     const std::size_t end = name.find('\0');
     if (end == std::string::npos) return std::nullopt;
     name.resize(end);
@@ -55,7 +55,7 @@ std::optional<Digest> digestNumbered(std::uint32_t number, ByteReader& reader, s
 
 }  // namespace
 
-std::optional<Header> parseHeader(foundation::ByteView bytes) try {
+std::optional<Header> parseHeader(base::ByteView bytes) try {
     ByteReader reader(bytes);
     if (reader.be32("magic") != kMagic) return std::nullopt;
     Header header;

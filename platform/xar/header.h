@@ -20,8 +20,8 @@
 #include <optional>
 #include <string_view>
 
+#include "base/bytes.h"
 #include "crypto/crypto.h"
-#include "foundation/bytes.h"
 
 namespace pinwell::xar {
 
@@ -45,6 +45,6 @@ struct Header {
 
 /// The header at the start of `bytes`, which are at most the file's first kLongestHeaderRead bytes. Returns
 /// `nullopt` if there is none.
-std::optional<Header> parseHeader(foundation::ByteView bytes);
+std::optional<Header> parseHeader(base::ByteView bytes);
 
 }  // namespace pinwell::xar

@@ -32,7 +32,7 @@ Inflater::Inflater(std::uint64_t limit, Sink sink)
 
 Inflater::~Inflater() = default;
 
-bool Inflater::feed(foundation::ByteView compressed) {
+bool Inflater::feed(base::ByteView compressed) {
     z_stream& state = stream_->state;
     while (!compressed.empty() && !complete_) {
         const auto piece = compressed.first(std::min(compressed.size(), kInflatedAtOnce));

@@ -5,14 +5,14 @@
 #include <functional>
 #include <memory>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::xar {
 
 class Inflater {
   public:
     /// Takes a piece of the contents, valid during the call; returns false to stop.
-    using Sink = std::function<bool(foundation::ByteView)>;
+    using Sink = std::function<bool(base::ByteView)>;
 
     /// `limit` is the maximum length of the contents, in bytes. Throws std::bad_alloc.
     Inflater(std::uint64_t limit, Sink sink);
@@ -22,7 +22,7 @@ class Inflater {
 
     /// Returns false if the stream is malformed, its contents exceed the limit, or the sink stops it; then
     /// feed no more. Bytes after the stream's end are skipped.
-    bool feed(foundation::ByteView compressed);
+    bool feed(base::ByteView compressed);
 
     /// Whether the stream has ended, with a correct checksum.
     bool complete() const noexcept { return complete_; }

@@ -3,14 +3,14 @@
 #include <string_view>
 #include <utility>
 
-#include "foundation/xml_parser.h"
+#include "values/xml_parser.h"
 
 namespace pinwell::xar {
 namespace {
 
-using foundation::ByteView;
-using foundation::XMLAttributes;
-using foundation::XMLParser;
+using base::ByteView;
+using values::XMLAttributes;
+using values::XMLParser;
 
 struct Refusal {};
 
@@ -38,7 +38,7 @@ std::string_view localName(std::string_view name) {
 
 }  // namespace
 
-class TableOfContentsReader::Document final : public foundation::XMLEvents {
+class TableOfContentsReader::Document final : public values::XMLEvents {
   public:
     XMLParser& parser() { return parser_; }
 
@@ -144,7 +144,7 @@ TableOfContentsReader::~TableOfContentsReader() = default;
 bool TableOfContentsReader::feed(ByteView bytes) try {
     document_->parser().feed(bytes);
     return true;
-} catch (const foundation::MalformedXML&) {
+} catch (const values::MalformedXML&) {
     return false;
 } catch (const Refusal&) {
     return false;
@@ -153,7 +153,7 @@ bool TableOfContentsReader::feed(ByteView bytes) try {
 std::optional<TableOfContents> TableOfContentsReader::finish() try {
     document_->parser().finish();
     return document_->take();
-} catch (const foundation::MalformedXML&) {
+} catch (const values::MalformedXML&) {
     return std::nullopt;
 } catch (const Refusal&) {
     return std::nullopt;

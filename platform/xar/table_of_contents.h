@@ -14,7 +14,7 @@
 // first one counts. But a second checksum, or a second offset or size in it, is refused, because all readers
 // must check the same bytes.
 //
-// Also refused: every document that foundation/xml_parser.h refuses, and any document type; a root other than
+// Also refused: every document that values/xml_parser.h refuses, and any document type; a root other than
 // `xar`; no `toc`, or two; and tables that exceed a limit below.
 #pragma once
 
@@ -25,7 +25,7 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::xar {
 
@@ -65,7 +65,7 @@ class TableOfContentsReader {
     TableOfContentsReader& operator=(const TableOfContentsReader&) = delete;
 
     /// Returns false if the document is refused; then feed no more. Throws std::bad_alloc.
-    bool feed(foundation::ByteView bytes);
+    bool feed(base::ByteView bytes);
 
     /// Call it once, and last. Returns `nullopt` if the document is refused. Throws std::bad_alloc.
     std::optional<TableOfContents> finish();

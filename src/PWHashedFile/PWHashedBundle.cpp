@@ -1,10 +1,10 @@
 #include "src/PWHashedFile/PWHashedBundle.h"
 
-#include "foundation/process.h"
-#include "foundation/signal_deferral.h"
-#include "foundation/value.h"
+#include "runtime/process.h"
+#include "runtime/signals.h"
 #include "src/cdhash_extract.h"
 #include "src/messages.h"
+#include "values/value.h"
 
 namespace pinwell {
 
@@ -39,7 +39,7 @@ std::optional<TicketPlaceFault> PWHashedBundle::ticketPlaceFault() {
 }
 
 std::optional<Data> PWHashedBundle::_cdHash() {
-    const foundation::Value properties = basicCodeProperties(*fileURL(), platform());
+    const values::Value properties = basicCodeProperties(*fileURL(), platform());
     const auto algorithm = properties[kDigestAlgorithmKey].unsignedIntegerValue();
     setDigestAlgorithm(static_cast<std::uint32_t>(algorithm));
     NoisyLog("Props are %@", properties);
@@ -48,13 +48,13 @@ std::optional<Data> PWHashedBundle::_cdHash() {
 }
 
 bool PWHashedBundle::writeNewTicketDataFromURL(const URL& source, ErrorOut error) {
-    const foundation::SignalDeferral uninterrupted;
+    const runtime::SignalDeferral uninterrupted;
     files::FileManager& files = platform().files;
     const URL ticket = codeResourcesURL();
 
     if (const auto isRegular = files.isRegularFile(ticket); isRegular && !*isRegular) {
         NoisyLog("%@ will not replace the compatibility symlink at %@. Please remove it manually",
-                 foundation::processName(), ticket);
+                 runtime::processName(), ticket);
         return failedToWrite(std::nullopt, error);
     }
     // Only the bytes: the source is a private temporary file, but everyone with the bundle reads the ticket.

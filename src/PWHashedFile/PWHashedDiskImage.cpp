@@ -6,20 +6,20 @@
 #include <utility>
 
 #include "formats/tm_ticket.h"
-#include "foundation/process.h"
-#include "foundation/value.h"
+#include "runtime/process.h"
 #include "src/cdhash_extract.h"
 #include "src/messages.h"
+#include "values/value.h"
 
 namespace pinwell {
 
+using base::ByteView;
+using base::Result;
 using codesign::SigningInformation;
 using codesign::Status;
-using foundation::Array;
-using foundation::ByteView;
-using foundation::Dictionary;
-using foundation::Result;
-using foundation::Value;
+using values::Array;
+using values::Dictionary;
+using values::Value;
 
 namespace {
 
@@ -74,7 +74,7 @@ Result<void> signDetached(const codesign::CodeSigningService& service, codesign:
 
 }  // namespace
 
-Status syntheticCDHashForURL(const foundation::URL& fileURL, const Platform& platform,
+Status syntheticCDHashForURL(const values::URL& fileURL, const Platform& platform,
                              std::uint32_t* digestAlgorithm, std::optional<Data>* cdHash) {
     if (digestAlgorithm == nullptr && cdHash == nullptr) return codesign::kParameterError;
     const codesign::CodeSigningService& service = platform.codeSigning;
@@ -153,12 +153,12 @@ bool PWHashedDiskImage::makeUpForMissingSignature(const std::string& name) {
 std::optional<Data> PWHashedDiskImage::_ticketData() {
     const BlobRecord* const blob = ticketBlobOf(signature_.blobs);
     if (blob == nullptr) return std::nullopt;
-    const foundation::ByteView ticket = ticketIn(*blob);
-    return foundation::toData(ticket.first(heldOfTicket(ticket.size())));
+    const base::ByteView ticket = ticketIn(*blob);
+    return base::toData(ticket.first(heldOfTicket(ticket.size())));
 }
 
 std::optional<Data> PWHashedDiskImage::_cdHash() {
-    const foundation::Value properties = basicCodeProperties(*fileURL(), platform());
+    const values::Value properties = basicCodeProperties(*fileURL(), platform());
     if (const Data* hash = properties[kCDHashKey].data(); hash != nullptr) {
         NoisyLog("Props are %@", properties);
         setDigestAlgorithm(
@@ -197,7 +197,7 @@ bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& sou
     if (!deleteExisting && !hasRoomForTicket(signature_.blobs, ticket))
         return refuseNewTicket(target, Error::posix(EFBIG, target.path()), error);
     try {
-        foundation::SparseBuffer superblob =
+        base::SparseBuffer superblob =
             superblobWithTicket(signature_.blobs, ticket, kUDIFHeaderSize, noisyDiagnostics());
         if (superblob.size() != 0 && !writeSignature(std::move(superblob), target, deleteExisting, held))
             return failedToWrite(held, error);
@@ -209,7 +209,7 @@ bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& sou
 }
 
 // The buffer has the superblob, and space for the trailer after it.
-bool PWHashedDiskImage::writeSignature(foundation::SparseBuffer signatureAndTrailer, const URL& target,
+bool PWHashedDiskImage::writeSignature(base::SparseBuffer signatureAndTrailer, const URL& target,
                                        bool deleteExisting, std::optional<Error>& held) {
     const std::size_t length = signatureAndTrailer.size() - kUDIFHeaderSize;
     signature_.trailer.setCodeSign(signature_.csStart, length);
@@ -237,7 +237,7 @@ bool PWHashedDiskImage::writeSignature(foundation::SparseBuffer signatureAndTrai
 void PWHashedDiskImage::saveDebugCopy(ByteView signatureAndTrailer, std::optional<Error>& held) const {
     files::FileManager& files = platform().files;
     const URL copy = files.temporaryDirectory().appendingPathComponent(
-        foundation::format("%@.dmgData", foundation::globallyUniqueString()));
+        values::format("%@.dmgData", runtime::globallyUniqueString()));
     const auto saved = files.writeFile(signatureAndTrailer, copy, files::FileManager::Writing::plain);
     if (!saved) {
         held = saved.error();

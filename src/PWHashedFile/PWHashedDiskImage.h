@@ -5,8 +5,8 @@
 // its first ticket. It is identified by a synthetic cdhash, which the ticket does not change.
 #pragma once
 
+#include "base/bytes.h"
 #include "formats/disk_image.h"
-#include "foundation/bytes.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 
 namespace pinwell {
@@ -18,7 +18,7 @@ class PWHashedDiskImage : public PWHashedFile {
     PWHashedDiskImage(const URL& fileURL, const Platform& platform);
 
     const UDIFFileHeader& dmgHeader() const noexcept { return signature_.trailer; }
-    const foundation::SharedBytes& superblob() const noexcept { return signature_.superblob; }
+    const base::SharedBytes& superblob() const noexcept { return signature_.superblob; }
     const BlobSet& blobs() const noexcept { return signature_.blobs; }
 
     /// For an image that was unsigned when it was read.
@@ -49,10 +49,10 @@ class PWHashedDiskImage : public PWHashedFile {
     bool populateHeader();
     bool makeUpForMissingSignature(const std::string& name);
 
-    void saveDebugCopy(foundation::ByteView signatureAndTrailer, std::optional<Error>& held) const;
-    void writeAtEndOfData(files::FileHandle& file, foundation::ByteView signatureAndTrailer,
+    void saveDebugCopy(base::ByteView signatureAndTrailer, std::optional<Error>& held) const;
+    void writeAtEndOfData(files::FileHandle& file, base::ByteView signatureAndTrailer,
                           const std::string& name) const;
-    bool writeSignature(foundation::SparseBuffer signatureAndTrailer, const URL& target, bool deleteExisting,
+    bool writeSignature(base::SparseBuffer signatureAndTrailer, const URL& target, bool deleteExisting,
                         std::optional<Error>& held);
 
     disk_image_signature signature_;  // for an unsigned image, an empty one
@@ -68,8 +68,7 @@ class PWHashedDiskImage : public PWHashedFile {
 /// platform's parameter error if both are null. Returns the status of the failed operation, or success. If
 /// the signature has no cdhash, it returns success and leaves the out-parameters unchanged. Reads the whole
 /// file, and never changes it.
-codesign::Status syntheticCDHashForURL(const foundation::URL& fileURL, const Platform& platform,
-                                       std::uint32_t* digestAlgorithm,
-                                       std::optional<foundation::Data>* cdHash);
+codesign::Status syntheticCDHashForURL(const values::URL& fileURL, const Platform& platform,
+                                       std::uint32_t* digestAlgorithm, std::optional<base::Data>* cdHash);
 
 }  // namespace pinwell

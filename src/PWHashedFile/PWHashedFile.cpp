@@ -1,11 +1,11 @@
 #include "src/PWHashedFile/PWHashedFile.h"
 
-#include "foundation/signal_deferral.h"
-#include "foundation/value.h"
+#include "runtime/signals.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "src/messages.h"
+#include "values/value.h"
 
 namespace pinwell {
 namespace {
@@ -162,7 +162,7 @@ bool PWHashedFile::refuseChangedFile(const std::optional<URL>& workingCopy) {
 
 bool PWHashedFile::common_writeNewTicketDataFromURL(const std::optional<URL>& source, bool deleteExisting,
                                                     ErrorOut error) {
-    const foundation::SignalDeferral uninterrupted;
+    const runtime::SignalDeferral uninterrupted;
     const auto cloning = platform_.files.volumeSupportsCloning(*fileURL_);
     const bool canClone = cloning && *cloning;
     const std::optional<URL> copy = canClone ? makeWorkingCopy() : std::nullopt;
@@ -190,7 +190,7 @@ bool PWHashedFile::common_writeNewTicketDataFromURL(const std::optional<URL>& so
 
 void PWHashedFile::mustOverride(std::string_view operation) const {
     throw InternalInconsistency(
-        foundation::format("You must override %@ in the %@ subclass", operation, className()));
+        values::format("You must override %@ in the %@ subclass", operation, className()));
 }
 
 std::optional<Data> PWHashedFile::_ticketData() {

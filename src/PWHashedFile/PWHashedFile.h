@@ -12,18 +12,18 @@
 #include <string>
 #include <string_view>
 
+#include "base/bytes.h"
+#include "base/error.h"
 #include "formats/explain_ticket.h"
-#include "foundation/bytes.h"
-#include "foundation/error.h"
-#include "foundation/url.h"
 #include "src/PWHashedFile/file_kind.h"
 #include "src/platform.h"
+#include "values/url.h"
 
 namespace pinwell {
 
-using foundation::Data;
-using foundation::Error;
-using foundation::URL;
+using base::Data;
+using base::Error;
+using values::URL;
 
 /// Exit codes of the tool, the BSD sysexits(3) numbers.
 inline constexpr std::int32_t kExitOK = 0;
@@ -158,8 +158,8 @@ class PWHashedFile {
     std::uint32_t digestAlgorithm_ = 0;
     std::optional<URL> fileURL_;
     Platform platform_;
-    foundation::Anchor held_;
-    std::optional<foundation::Result<files::ItemState>> stateWhenRead_;
+    base::Anchor held_;
+    std::optional<base::Result<files::ItemState>> stateWhenRead_;
 
     std::recursive_mutex mutex_;
     std::optional<Data> internalTicketData_;  // empty: read, and none found

@@ -10,20 +10,20 @@
 #include <type_traits>
 #include <utility>
 
-#include "foundation/handle.h"
-#include "foundation/process.h"
+#include "base/handle.h"
+#include "runtime/process.h"
 #include "src/messages.h"
 
 namespace pinwell {
 
-using foundation::ByteView;
+using base::ByteView;
 
 namespace {
 
 constexpr std::int32_t kReading = 0;
 constexpr std::string_view kSignatureType = "CMS";
 
-using Archive = foundation::Handle<std::remove_pointer_t<xar_t>, xar_close>;
+using Archive = base::Handle<std::remove_pointer_t<xar_t>, xar_close>;
 
 struct Free {
     void operator()(std::uint8_t* bytes) const noexcept { std::free(bytes); }  // NOLINT(*-no-malloc)
@@ -90,7 +90,7 @@ std::optional<Data> PWHashedFlatPackage::_cdHash() {
         algorithm = algorithmOfSize(size);
     }
     setDigestAlgorithm(algorithm);
-    return foundation::toData(std::as_bytes(std::span(signedData.get(), length)));
+    return base::toData(std::as_bytes(std::span(signedData.get(), length)));
 }
 
 std::optional<Data> PWHashedFlatPackage::_ticketData() {
@@ -136,7 +136,7 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
     }
     std::optional<URL> copy;
     try {
-        foundation::SparseBuffer tail = tailWith(ticket);
+        base::SparseBuffer tail = tailWith(ticket);
         // A write to a clone may be interrupted: the original still exists.
         if (target == fileURL()) copy = saveMovedTrailers(**opened, tail);
         writeTail(**opened, tail.view().subspan(kTrailerSize), targetName);
@@ -152,11 +152,10 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
 }
 
 // With space at the start for the bytes before the tail: the terminator, or a trailer's record.
-foundation::SparseBuffer PWHashedFlatPackage::tailWith(ByteView ticket) const {
+base::SparseBuffer PWHashedFlatPackage::tailWith(ByteView ticket) const {
     const ByteView moved = trailers_.dataToAppend ? trailers_.dataToAppend->view() : ByteView();
     const std::size_t recordSize = ticket.empty() ? 0 : kTrailerSize;
-    foundation::SparseBuffer tail =
-        files::makeBuffer(kTrailerSize + moved.size() + ticket.size() + recordSize);
+    base::SparseBuffer tail = files::makeBuffer(kTrailerSize + moved.size() + ticket.size() + recordSize);
     tail.put(kTrailerSize, moved);
     if (ticket.empty()) return tail;
     tail.put(kTrailerSize + moved.size(), ticket);
@@ -169,7 +168,7 @@ foundation::SparseBuffer PWHashedFlatPackage::tailWith(ByteView ticket) const {
 // written. The copy begins with the bytes before them in the package, and its name has their offset. The copy
 // is optional: the write goes on without it.
 std::optional<URL> PWHashedFlatPackage::saveMovedTrailers(files::FileHandle& file,
-                                                          foundation::SparseBuffer& tail) const {
+                                                          base::SparseBuffer& tail) const {
     if (!trailers_.dataToAppend || trailers_.ticketStart < kTrailerSize) return std::nullopt;
     const std::uint64_t offset = trailers_.ticketStart - kTrailerSize;
     try {
@@ -182,7 +181,7 @@ std::optional<URL> PWHashedFlatPackage::saveMovedTrailers(files::FileHandle& fil
     }
     files::FileManager& files = platform().files;
     const URL copy = files.temporaryDirectory().appendingPathComponent(
-        foundation::format("%@.%llu.pkgTrailers", foundation::globallyUniqueString(), offset));
+        values::format("%@.%llu.pkgTrailers", runtime::globallyUniqueString(), offset));
     if (!files.writeFile(tail.view(), copy, files::FileManager::Writing::plain)) return std::nullopt;
     return copy;
 }

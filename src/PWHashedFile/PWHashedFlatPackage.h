@@ -5,8 +5,8 @@
 // the ones after the old ticket move before the new one, all others keep their place.
 #pragma once
 
+#include "base/bytes.h"
 #include "formats/package_trailers.h"
-#include "foundation/bytes.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 
 namespace pinwell {
@@ -27,9 +27,7 @@ class PWHashedFlatPackage : public PWHashedFile {
     bool hasTrailers() const noexcept { return trailers_.hasTrailers; }
 
     /// The unknown trailers after the ticket, in file order; `nullopt` if there are none.
-    const std::optional<foundation::SharedBytes>& dataToAppend() const noexcept {
-        return trailers_.dataToAppend;
-    }
+    const std::optional<base::SharedBytes>& dataToAppend() const noexcept { return trailers_.dataToAppend; }
 
     std::optional<TicketPlaceFault> ticketPlaceFault() override;
 
@@ -48,9 +46,9 @@ class PWHashedFlatPackage : public PWHashedFile {
 
   private:
     std::string name() const { return fileURL()->lastPathComponent(); }
-    foundation::SparseBuffer tailWith(foundation::ByteView ticket) const;
-    std::optional<URL> saveMovedTrailers(files::FileHandle& file, foundation::SparseBuffer& tail) const;
-    void writeTail(files::FileHandle& file, foundation::ByteView tail, const std::string& targetName);
+    base::SparseBuffer tailWith(base::ByteView ticket) const;
+    std::optional<URL> saveMovedTrailers(files::FileHandle& file, base::SparseBuffer& tail) const;
+    void writeTail(files::FileHandle& file, base::ByteView tail, const std::string& targetName);
 
     package_trailers trailers_;  // without the ticket, which was moved out
 };

@@ -3,9 +3,9 @@
 
 #include <stdexcept>
 
+#include "base/byte_io.h"
+#include "base/bytes.h"
 #include "costly_input.h"
-#include "foundation/byte_writer.h"
-#include "foundation/bytes.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "support/archive_builder.h"
 #include "support/temporary_directory.h"
@@ -15,12 +15,12 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::toData;
+using base::toData;
 
 /// Whether the archive has a hash.
 bool read(const Data& archive) {
     TestPlatform platform;
-    writeFile(platform.directory / "Sample.pkg", foundation::ByteView(archive));
+    writeFile(platform.directory / "Sample.pkg", base::ByteView(archive));
     PWHashedFlatPackage package(platform.directory.url("Sample.pkg"), platform.services());
     return package.cdHash().has_value();
 }
@@ -28,7 +28,7 @@ bool read(const Data& archive) {
 /// The zlib stream with this document, stored without compression: as long as its contents.
 Data stored(const std::string& document) {
     constexpr std::size_t kLongestBlock = 65535;
-    foundation::ByteWriter stream;
+    base::ByteWriter stream;
     stream.be16(0x7801);
     uLong check = adler32(0, nullptr, 0);
     std::vector<Bytef> piece;
@@ -104,7 +104,7 @@ Data compressed(const std::string& unit, const std::function<bool(std::size_t, s
             state.next_out = room.data();
             state.avail_out = static_cast<uInt>(room.size());
             deflate(&state, flush);
-            foundation::append(out, std::as_bytes(std::span(room)).first(room.size() - state.avail_out));
+            base::append(out, std::as_bytes(std::span(room)).first(room.size() - state.avail_out));
         } while (state.avail_out == 0);
     };
     const std::size_t end = before.find("</toc>");
@@ -158,7 +158,7 @@ class Blocks {
 
     Data stream() && {
         Data whole = toData(std::string_view("\x78\x9C", 2));
-        foundation::append(whole, bytes_);
+        base::append(whole, bytes_);
         return whole;
     }
 

@@ -1,9 +1,9 @@
 // Disk images and packages: the index of a superblob, and the chain of trailers.
 #include <memory>
 
+#include "base/byte_io.h"
 #include "codesign/code_signing.h"
 #include "costly_input.h"
-#include "foundation/byte_writer.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "support/code_directory_builder.h"
@@ -14,13 +14,13 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::ByteWriter;
-using foundation::toData;
+using base::ByteWriter;
+using base::toData;
 
 /// Whether it is a disk image; reads its ticket and its hash.
 bool readImage(const Data& image) {
     TestPlatform platform;
-    writeFile(platform.directory / "Sample.dmg", foundation::ByteView(image));
+    writeFile(platform.directory / "Sample.dmg", base::ByteView(image));
     const auto codeSigning = codesign::makeCodeSigningService();
     const Platform services = platform.servicesWith(*codeSigning);
     PWHashedDiskImage file(platform.directory.url("Sample.dmg"), services);
@@ -32,7 +32,7 @@ bool readImage(const Data& image) {
 /// Whether the package has a ticket.
 bool readPackage(const Data& package) {
     TestPlatform platform;
-    writeFile(platform.directory / "Sample.pkg", foundation::ByteView(package));
+    writeFile(platform.directory / "Sample.pkg", base::ByteView(package));
     PWHashedFlatPackage file(platform.directory.url("Sample.pkg"), platform.services());
     return file.ticketData().has_value();
 }

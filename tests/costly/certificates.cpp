@@ -13,11 +13,11 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::ByteView;
+using base::ByteView;
 using trust::X509Certificate;
 
 constexpr const char* kServerHost = "api.lumora.example";
-constexpr foundation::Date kJudgedAt{1795204500};  // 2026-11-20 19:55:00 UTC
+constexpr values::Date kJudgedAt{1795204500};  // 2026-11-20 19:55:00 UTC
 
 // The maximum that a server may send.
 constexpr std::size_t kListed = 16;
@@ -28,7 +28,7 @@ constexpr std::size_t kLargePart = 125000;
 /// Judges the list as a server's, without anchors.
 void judge(const std::vector<ByteView>& list) {
     const auto service = trust::makeTrustService(
-        foundation::PlatformDirectory("/nowhere"), [](std::string_view) {}, [] { return kJudgedAt; });
+        config::PlatformDirectory("/nowhere"), [](std::string_view) {}, [] { return kJudgedAt; });
     std::vector<trust::CertificateRef> certificates;
     for (const ByteView der : list) certificates.push_back(service->parseCertificate(der));
     const auto object = service->makeTrust(certificates, trust::pinnedServerPolicy(kServerHost));
@@ -63,9 +63,9 @@ bool readDenied(const Data& input) {
 /// Copies end to end, up to about that length.
 Data copies(const std::vector<Data>& certificates, std::size_t length) {
     Data once;
-    for (const Data& certificate : certificates) foundation::append(once, certificate);
+    for (const Data& certificate : certificates) base::append(once, certificate);
     Data all = once;
-    while (all.size() + once.size() <= length) foundation::append(all, once);
+    while (all.size() + once.size() <= length) base::append(all, once);
     return all;
 }
 
@@ -75,18 +75,18 @@ Data ordinaryList(std::size_t length) {
 
 Data joined(const Data& first, const Data& second) {
     Data all = first;
-    foundation::append(all, second);
+    base::append(all, second);
     return all;
 }
 
 Data manyOf(const Data& part, std::size_t length) {
     Data all;
-    while (all.size() + part.size() <= length) foundation::append(all, part);
+    while (all.size() + part.size() <= length) base::append(all, part);
     return all;
 }
 
 Data textElement(std::uint8_t tag, std::string_view contents) {
-    return derElement(tag, foundation::asBytes(contents));
+    return derElement(tag, base::asBytes(contents));
 }
 
 const Data& sequence() {
@@ -178,16 +178,15 @@ Data crossedNames(std::size_t length) {
 }
 
 CostlyInput pemRow(std::string name, std::string cost, std::function<std::string(std::size_t)> make) {
-    return {
-        .name = "Pem" + name,
-        .cost = std::move(cost),
-        .read = readDenied,
-        .isTaken = false,
-        .costly = [make = std::move(make)](std::size_t length) { return foundation::toData(make(length)); },
-        .control =
-            [](std::size_t length) {
-                return foundation::toData(filled(ServerChain(kServerHost).issue().leaf.pem(), length));
-            }};
+    return {.name = "Pem" + name,
+            .cost = std::move(cost),
+            .read = readDenied,
+            .isTaken = false,
+            .costly = [make = std::move(make)](std::size_t length) { return base::toData(make(length)); },
+            .control =
+                [](std::size_t length) {
+                    return base::toData(filled(ServerChain(kServerHost).issue().leaf.pem(), length));
+                }};
 }
 
 std::vector<CostlyInput> crossings() {
@@ -271,7 +270,7 @@ std::vector<CostlyInput> certificateInputs() {
         certificateRow("Nesting", "elements inside elements", false, edited([](Elements& all) {
                            Data nested;
                            for (int i = 0; i < 2000; ++i) nested = derElement(0x30, nested);
-                           foundation::append(nested, manyOf(sequence(), kLargePart));
+                           base::append(nested, manyOf(sequence(), kLargePart));
                            all.extensions = derElement(0xA3, nested);
                        })),
         certificateRow("Elements", "elements of no byte", false, edited([](Elements& all) {

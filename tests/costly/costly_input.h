@@ -14,11 +14,11 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::test {
 
-using foundation::Data;
+using base::Data;
 
 struct CostlyInput {
     std::string name;  // as part of a test's name

@@ -51,7 +51,7 @@ INSTANTIATE_TEST_SUITE_P(Inputs, Costly, testing::ValuesIn(costlyInputs()),
                          [](const auto& tested) { return tested.param.name; });
 
 Data fiveBytes() {
-    return foundation::toData("12345");
+    return base::toData("12345");
 }
 
 // The precondition of the table: a higher cost is found.

@@ -1,16 +1,16 @@
 // JSON: responses of the service, platform.json, user defaults.
-#include "foundation/json.h"
+#include "values/json.h"
+#include "base/bytes.h"
 #include "costly_input.h"
-#include "foundation/bytes.h"
-#include "foundation/value.h"
+#include "values/value.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::toData;
+using base::toData;
 
 bool read(const Data& document) {
-    return foundation::parseJSON(document).has_value();
+    return values::parseJSON(document).has_value();
 }
 
 std::string number(std::size_t i) {

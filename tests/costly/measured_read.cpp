@@ -52,8 +52,7 @@ void forgetPeak() {
     if (!file.flush()) throw std::runtime_error("the peak of the memory cannot be reset");
 }
 
-Report readHere(const std::function<bool(const foundation::Data&)>& read, const foundation::Data& input,
-                int runs) {
+Report readHere(const std::function<bool(const base::Data&)>& read, const base::Data& input, int runs) {
     Report report;
     try {
         forgetPeak();
@@ -92,8 +91,8 @@ std::string endOf(int status, unsigned limit) {
 
 }  // namespace
 
-MeasuredRead measureRead(const std::function<bool(const foundation::Data&)>& read,
-                         const foundation::Data& input, int runs, unsigned limit) {
+MeasuredRead measureRead(const std::function<bool(const base::Data&)>& read, const base::Data& input,
+                         int runs, unsigned limit) {
     std::array<int, 2> ends{};
     if (pipe(ends.data()) != 0) throw std::runtime_error("no pipe");
     const pid_t child = fork();

@@ -4,7 +4,7 @@
 #include <functional>
 #include <string>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::test {
 
@@ -19,8 +19,8 @@ struct MeasuredRead {
 
 /// A forked child reads the input `runs` times, within `limit` seconds of processor time in all. The caller
 /// must have one thread.
-MeasuredRead measureRead(const std::function<bool(const foundation::Data&)>& read,
-                         const foundation::Data& input, int runs, unsigned limit);
+MeasuredRead measureRead(const std::function<bool(const base::Data&)>& read, const base::Data& input,
+                         int runs, unsigned limit);
 
 /// Whether resident memory measures the code's needs: not under a sanitizer, which needs memory itself.
 bool memoryIsMeasured();

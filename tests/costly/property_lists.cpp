@@ -1,18 +1,18 @@
 // Property lists, in XML and in the binary form: the Info.plist of a bundle.
+#include "base/byte_io.h"
+#include "base/bytes.h"
 #include "costly_input.h"
-#include "foundation/byte_writer.h"
-#include "foundation/bytes.h"
-#include "foundation/property_list.h"
-#include "foundation/value.h"
+#include "values/property_list.h"
+#include "values/value.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::ByteWriter;
-using foundation::toData;
+using base::ByteWriter;
+using base::toData;
 
 bool read(const Data& document) {
-    return foundation::parsePropertyList(document).has_value();
+    return values::parsePropertyList(document).has_value();
 }
 
 std::string number(std::size_t i) {

@@ -182,7 +182,7 @@ TEST_F(Acceptance, AValidationAsksTheServiceTooAndChangesNothing) {
     EXPECT_THAT(validateAgainst(current), Ended(0, ElementsAre(processing(), kValidated)));
     EXPECT_EQ(service().requests().size(), 1U);
     EXPECT_EQ(stapled(), old);
-    EXPECT_EQ(keptTicket(), foundation::toString(current));
+    EXPECT_EQ(keptTicket(), base::toString(current));
 }
 
 TEST_F(Acceptance, ATicketThatWasRevokedSinceItWasStapledFailsTheValidation) {
@@ -219,7 +219,7 @@ TEST_F(Acceptance, AValidationFailsWhenTheServiceCannotBeReached) {
 TEST_F(Acceptance, ATicketThatCannotBeKeptIsNotStapled) {
     environment["TMPDIR"] = directory / "nowhere";
     const std::string url =
-        foundation::URL::fileURLWithPath(directory / "nowhere/REQUEST.ticket").absoluteString();
+        values::URL::fileURLWithPath(directory / "nowhere/REQUEST.ticket").absoluteString();
     const auto line =
         StartsWith("Could not write ticket to " + url + " due to Error Domain=POSIXErrorDomain Code=2 ");
     EXPECT_THAT(stapleTicket(ticket()), Ended(73, ElementsAre(processing(), line, stapleFailed(73))));
@@ -243,7 +243,7 @@ TEST_F(Acceptance, ATicketFileOfAnEarlierRunIsReplaced) {
     const Data genuine = ticket();
     EXPECT_THAT(stapleTicket(genuine), Worked());
     EXPECT_EQ(stapled(), genuine);
-    EXPECT_EQ(keptTicket(), foundation::toString(genuine));
+    EXPECT_EQ(keptTicket(), base::toString(genuine));
 }
 
 // A file that changes during the lookup.
@@ -317,7 +317,7 @@ TEST_F(ChangingFile, ThatGetsALinkInTheTicketsPlaceIsLeftAlone) {
 
 TEST_F(ChangingFile, ThatIsStapledByAnotherRunMeanwhileEndsWithAGoodTicket) {
     EXPECT_THAT(stapleWhile([&] { stapleByHand(ticket()); }), Worked());
-    EXPECT_EQ(foundation::toString(*stapled()), keptTicket());
+    EXPECT_EQ(base::toString(*stapled()), keptTicket());
 }
 
 }  // namespace

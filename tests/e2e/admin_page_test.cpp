@@ -11,8 +11,8 @@
 #include <thread>
 
 #include "admin_service.h"
+#include "base/byte_io.h"
 #include "browser.h"
-#include "foundation/byte_reader.h"
 
 namespace pinwell::test {
 namespace {
@@ -297,7 +297,7 @@ TEST_F(AdminPage, CanBePictured) {
     ASSERT_EQ(result.exitStatus, 0) << result.errors;
     const std::string bytes = readFile(picture);
     ASSERT_GT(bytes.size(), 5000U);  // a blank one has fewer
-    foundation::ByteReader reader(foundation::asBytes(bytes));
+    base::ByteReader reader(base::asBytes(bytes));
     reader.seek(16, "width");
     EXPECT_EQ(reader.be32("width"), 800U);
     EXPECT_EQ(reader.be32("height"), 600U);

@@ -3,18 +3,18 @@
 #include <stdexcept>
 
 #include "admin_service.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::Value;
 using testing::AllOf;
 using testing::Each;
 using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::SizeIs;
+using values::Value;
 
 class AdminRequest : public AdminServiceTest {
   protected:
@@ -28,7 +28,7 @@ class AdminRequest : public AdminServiceTest {
     /// The output of a command as JSON.
     Value json(const std::string& command) const {
         const std::string text = lumora({command, serviceDirectory, "--json"}).output;
-        const auto document = foundation::parseJSON(foundation::asBytes(text));
+        const auto document = values::parseJSON(base::asBytes(text));
         if (!document) throw std::runtime_error(command + " printed no JSON: " + text);
         return *document;
     }

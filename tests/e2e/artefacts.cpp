@@ -2,7 +2,8 @@
 
 #include <utility>
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
+#include "base/text.h"
 #include "support/archive_builder.h"
 #include "support/code_directory_builder.h"
 #include "support/disk_image_builder.h"
@@ -14,7 +15,7 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::ByteWriter;
+using base::ByteWriter;
 
 constexpr std::uint8_t kSHA1 = 1;
 constexpr std::uint8_t kSHA256 = 2;
@@ -45,14 +46,14 @@ Data madeUpCodeDirectory(const Data& data, const Data& trailer) {
 }
 
 std::string imageWith(const Data& data, SuperBlobBuilder superblob, const Data& ticket) {
-    superblob.blob(kSampleTicketSlot, ticketBlob(foundation::toString(ticket)));
-    return foundation::toString(DiskImageBuilder().data(data).superblob(superblob).build());
+    superblob.blob(kSampleTicketSlot, ticketBlob(base::toString(ticket)));
+    return base::toString(DiskImageBuilder().data(data).superblob(superblob).build());
 }
 
 }  // namespace
 
 std::string Artefact::prettyHash() const {
-    return std::to_string(algorithm) + "/" + foundation::toHex(hash);
+    return std::to_string(algorithm) + "/" + base::toHex(hash);
 }
 
 TicketPayloadBuilder Artefact::payload() const {
@@ -66,13 +67,13 @@ std::string Artefact::kind() const {
 }
 
 Data irregularData(std::size_t count) {
-    return foundation::toData(irregularBytes(count));
+    return base::toData(irregularBytes(count));
 }
 
 Artefact signedImage(const Data& data) {
     const SuperBlobBuilder signature = DiskImageBuilder::signature();
     return {.name = "Signed.dmg",
-            .contents = foundation::toString(DiskImageBuilder().data(data).superblob(signature).build()),
+            .contents = base::toString(DiskImageBuilder().data(data).superblob(signature).build()),
             .algorithm = kSHA256,
             .hash = codeHashOf(kSHA256, DiskImageBuilder::codeDirectory()),
             .stapledWith = [=](const Data& ticket) { return imageWith(data, signature, ticket); }};
@@ -81,7 +82,7 @@ Artefact signedImage(const Data& data) {
 Artefact unsignedImage(const Data& data) {
     const DiskImageBuilder image = DiskImageBuilder().data(data);
     return {.name = "Unsigned.dmg",
-            .contents = foundation::toString(image.build()),
+            .contents = base::toString(image.build()),
             .algorithm = kSHA256,
             .hash = codeHashOf(kSHA256, madeUpCodeDirectory(data, image.trailer())),
             .stapledWith = [=](const Data& ticket) { return imageWith(data, SuperBlobBuilder(), ticket); }};
@@ -95,7 +96,7 @@ Artefact signedPackage(const Data& data) {
             .algorithm = kSHA1,
             .hash = archive.rightChecksum(),
             .stapledWith = [=](const Data& ticket) {
-                return PackageBuilder(package).terminator().ticket(foundation::toString(ticket)).build();
+                return PackageBuilder(package).terminator().ticket(base::toString(ticket)).build();
             }};
 }
 
@@ -103,10 +104,10 @@ Artefact signedBundle(const Data& data) {
     const Data codeDirectory = CodeDirectoryBuilder().covers(2, emptyRequirements()).build();
     const SuperBlobBuilder signature = SuperBlobBuilder::adHoc(codeDirectory);
     return {.name = "Signed.app",
-            .contents = foundation::toString(data),
+            .contents = base::toString(data),
             .algorithm = kSHA256,
             .hash = codeHashOf(kSHA256, codeDirectory),
-            .stapledWith = [](const Data& ticket) { return foundation::toString(ticket); },
+            .stapledWith = [](const Data& ticket) { return base::toString(ticket); },
             .executable = ExecutableImageBuilder().signature(signature.build()).build()};
 }
 

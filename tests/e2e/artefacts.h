@@ -13,12 +13,12 @@
 #include <functional>
 #include <string>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "support/ticket_builder.h"
 
 namespace pinwell::test {
 
-using foundation::Data;
+using base::Data;
 
 struct Artefact {
     std::string name;      // a file name with the kind's extension

@@ -166,7 +166,7 @@ class Package : public EndToEndTest {
     const std::string path = directory / "builds/Sample.pkg";
 
     PackageBuilder package() const { return PackageBuilder().archive(archive.build()); }
-    static std::string text(const Data& bytes) { return foundation::toString(bytes); }
+    static std::string text(const Data& bytes) { return base::toString(bytes); }
 
     /// The package after stapling `ticket`.
     std::string stapled(const PackageBuilder& package) {

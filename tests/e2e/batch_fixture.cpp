@@ -3,9 +3,9 @@
 #include <algorithm>
 #include <filesystem>
 
-#include "foundation/base64.h"
-#include "foundation/json.h"
+#include "base/text.h"
 #include "schema_validation.h"
+#include "values/json.h"
 
 namespace pinwell::test {
 
@@ -62,7 +62,7 @@ std::vector<Artefact> BatchTest::writeImages(std::size_t count, const std::strin
     std::vector<Artefact> images;
     for (std::size_t i = 0; i < count; ++i) {
         const std::string number = std::to_string(i);
-        images.push_back(writeArtefact(unsignedImage(foundation::toData("image " + folder + number)),
+        images.push_back(writeArtefact(unsignedImage(base::toData("image " + folder + number)),
                                        directory / (folder + "/Image" + number + ".dmg")));
         records[recordNameOf(images.back())] = ticketOf(images.back());
     }
@@ -93,7 +93,7 @@ std::vector<std::string> BatchTest::pathsOf(const std::vector<Artefact>& artefac
 
 std::vector<std::string> BatchTest::namesIn(const RecordedRequest& request) {
     std::vector<std::string> names;
-    const auto body = foundation::parseJSON(foundation::asBytes(request.body));
+    const auto body = values::parseJSON(base::asBytes(request.body));
     if (!body) return names;
     for (const Value& record : *(*body)["records"].array()) names.push_back(*record["recordName"].string());
     return names;
@@ -110,7 +110,7 @@ std::string BatchTest::bodyFor(const std::vector<std::string>& names) const {
                     R"(","serverErrorCode":"NOT_FOUND","reason":"Record not found"})";
         else
             body += R"({"recordName":")" + name + R"(","fields":{"signedTicket":{"type":"BYTES","value":")" +
-                    foundation::encodeBase64(*found->second) + R"("}}})";
+                    base::encodeBase64(*found->second) + R"("}}})";
     }
     return R"({"records":[)" + body + "]}";
 }
@@ -129,7 +129,7 @@ std::vector<std::size_t> BatchTest::groupSizes() {
 std::vector<Value> BatchTest::reportsOf(const ProcessResult& result) {
     std::vector<Value> reports;
     for (const std::string& line : result.outputLines()) {
-        const auto document = foundation::parseJSON(foundation::asBytes(line));
+        const auto document = values::parseJSON(base::asBytes(line));
         EXPECT_TRUE(document.has_value()) << line;
         if (document && (*document)["summary"].isNil()) reports.push_back(*document);
     }
@@ -139,7 +139,7 @@ std::vector<Value> BatchTest::reportsOf(const ProcessResult& result) {
 Value BatchTest::summaryOf(const ProcessResult& result) {
     const std::vector<std::string> lines = result.outputLines();
     if (lines.empty()) return {};
-    const auto document = foundation::parseJSON(foundation::asBytes(lines.back()));
+    const auto document = values::parseJSON(base::asBytes(lines.back()));
     return document ? (*document)["summary"] : Value();
 }
 

@@ -12,13 +12,13 @@
 #include <vector>
 
 #include "artefacts.h"
+#include "base/bytes.h"
 #include "fixture.h"
-#include "foundation/bytes.h"
-#include "foundation/value.h"
+#include "values/value.h"
 
 namespace pinwell::test {
 
-using foundation::Value;
+using values::Value;
 
 /// Matches the line of an artefact by its cause and exit status.
 testing::Matcher<const Value&> Reports(const std::string& cause, int exitStatus);

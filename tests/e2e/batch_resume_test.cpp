@@ -9,8 +9,8 @@
 #include <filesystem>
 #include <set>
 
+#include "base/handle.h"
 #include "batch_fixture.h"
-#include "foundation/file_io.h"
 #include "support/volume.h"
 
 namespace pinwell::test {
@@ -64,7 +64,7 @@ class BatchResume : public BatchTest {
     }
     /// Until there is no room left on its volume.
     static void fill(const std::string& path) {
-        const foundation::FileDescriptor file(::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600));
+        const base::FileDescriptor file(::open(path.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600));
         const std::string block(4096, 'b');
         while (::write(file.get(), block.data(), block.size()) > 0) continue;
         ASSERT_EQ(errno, ENOSPC);
@@ -135,7 +135,7 @@ TEST_F(BatchResume, ARebuiltArtefactIsDoneAgain) {
     serveRecords();
     ASSERT_EQ(resume(images).exitStatus, 0);
     askedFor();
-    images[1] = writeArtefact(unsignedImage(foundation::toData("built anew")), images[1].path);
+    images[1] = writeArtefact(unsignedImage(base::toData("built anew")), images[1].path);
     records[recordNameOf(images[1])] = ticketOf(images[1]);
     const ProcessResult again = resume(images);
     EXPECT_EQ(again.exitStatus, 0);
@@ -150,7 +150,7 @@ TEST_F(BatchResume, AnArtefactRebuiltWithTheSameLengthAndTimeIsDoneAgain) {
     ASSERT_EQ(resume(images).exitStatus, 0);
     const auto time = std::filesystem::last_write_time(images[0].path);
     const auto length = std::filesystem::file_size(images[0].path);
-    const Artefact other = unsignedImage(foundation::toData("image builds/manyX"));
+    const Artefact other = unsignedImage(base::toData("image builds/manyX"));
     records[recordNameOf(other)] = ticketOf(other);
     writeFile(images[0].path, other.stapledWith(issuedFor(other)));
     ASSERT_EQ(std::filesystem::file_size(images[0].path), length);
@@ -269,7 +269,7 @@ TEST_F(BatchResume, NamesOfAnyShapeAreKept) {
     std::vector<Artefact> images;
     for (const char* name :
          {"with blank.dmg", "with\nnewline.dmg", "with%20.dmg", "with\xff\xfe.dmg", "\xc3\xa4.dmg"}) {
-        images.push_back(writeArtefact(unsignedImage(foundation::toData(name)),
+        images.push_back(writeArtefact(unsignedImage(base::toData(name)),
                                        directory / ("builds/many/" + std::string(name))));
         records[recordNameOf(images.back())] = ticketOf(images.back());
     }
@@ -498,7 +498,7 @@ TEST_P(BatchSignal, EndsARunThatWaitsForItsList) {
     const std::string list = directory / "builds/list";
     ASSERT_EQ(::mkfifo(list.c_str(), 0600), 0);
     RunningProcess run(batchCommand({"staple", "--json", "--from", list}));
-    const foundation::FileDescriptor writer(::open(list.c_str(), O_WRONLY | O_CLOEXEC));
+    const base::FileDescriptor writer(::open(list.c_str(), O_WRONLY | O_CLOEXEC));
     const std::string line = images[0].path + "\n";
     ASSERT_EQ(::write(writer.get(), line.data(), line.size()), static_cast<ssize_t>(line.size()));
     ASSERT_TRUE(run.waitForLine("{\"path\"").has_value());

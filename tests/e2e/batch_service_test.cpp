@@ -331,7 +331,7 @@ class BatchAssets : public BatchService {
         return target.substr(kPrefix, target.rfind('/') - kPrefix);
     }
     Response assetOf(const std::string& recordName) {
-        return {.body = foundation::toString(*records.at(recordName))};
+        return {.body = base::toString(*records.at(recordName))};
     }
 };
 
@@ -359,7 +359,7 @@ TEST_F(BatchAssets, ThatAreOutOfReachAreTriedAgainWithTheirRecords) {
 TEST_F(BatchAssets, OfAnotherSizeThanAnnouncedAreNotAcceptable) {
     const auto images = writeImages(1);
     serveAssets([this](const std::string& name) {
-        return Response{.body = foundation::toString(*records.at(name)) + "x"};
+        return Response{.body = base::toString(*records.at(name)) + "x"};
     });
     const ProcessResult result = batch({"staple", "--json", "--retry-delay", "0"}, images);
     EXPECT_EQ(result.exitStatus, 65);

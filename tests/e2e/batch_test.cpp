@@ -6,7 +6,7 @@
 #include <filesystem>
 
 #include "batch_fixture.h"
-#include "foundation/sanitized.h"
+#include "runtime/process.h"
 #include "schema_validation.h"
 
 namespace pinwell::test {
@@ -93,7 +93,7 @@ TEST_F(Batch, ReportsTheCauseOfEachOutcome) {
 
 TEST_F(Batch, AnUnsignedBundleHasNoHash) {
     std::filesystem::remove_all(bundle + "/Contents/MacOS");
-    BundleBuilder().executable(foundation::toData("#!/bin/sh\n")).write(directory / "builds/Unsigned.app");
+    BundleBuilder().executable(base::toData("#!/bin/sh\n")).write(directory / "builds/Unsigned.app");
     serveRecords();
     const ProcessResult result = batch({"staple", "--json", directory / "builds/Unsigned.app"});
     EXPECT_EQ(result.exitStatus, 66);
@@ -253,7 +253,7 @@ TEST_F(Batch, PathsOfTheCommandLineComeBeforePathsOfTheList) {
 
 TEST_F(Batch, ZeroBytesEndPathsThatHoldNewlines) {
     const Artefact image =
-        writeArtefact(unsignedImage(foundation::toData("odd")), directory / "builds/many/odd\nname.dmg");
+        writeArtefact(unsignedImage(base::toData("odd")), directory / "builds/many/odd\nname.dmg");
     records[recordNameOf(image)] = ticketOf(image);
     serveRecords();
     const ProcessResult result = batch({"staple", "-0", "--from", list(image.path + std::string(1, '\0'))});
@@ -294,7 +294,7 @@ TEST_F(Batch, PathsThatNameNoArtefactEndOneByOne) {
 }
 
 TEST_F(Batch, ALongListNeedsNoMoreMemory) {
-    if (foundation::kSanitized) GTEST_SKIP() << "a sanitizer keeps what was freed";
+    if (runtime::kSanitized) GTEST_SKIP() << "a sanitizer keeps what was freed";
     // In KiB, of a run over so many paths of 4,000 bytes each.
     const auto memoryFor = [&](int count) {
         std::string folders;
@@ -434,8 +434,8 @@ TEST_F(Batch, HelpAndVersionGoToStandardOutput) {
 }
 
 TEST_F(Batch, EveryWordAfterTwoDashesIsAPath) {
-    writeArtefact(unsignedImage(foundation::toData("dashed")), directory / "builds/--help.dmg");
-    const Artefact image = unsignedImage(foundation::toData("dashed"));
+    writeArtefact(unsignedImage(base::toData("dashed")), directory / "builds/--help.dmg");
+    const Artefact image = unsignedImage(base::toData("dashed"));
     records[recordNameOf(image)] = ticketOf(image);
     serveRecords();
     EXPECT_EQ(batch({"staple", "--", "--help.dmg"}).exitStatus, 0);

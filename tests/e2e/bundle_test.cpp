@@ -19,7 +19,7 @@ class Bundle : public EndToEndTest {
     Bundle() { serveTicket(genuine); }
 
     static std::string urlOf(const std::string& path) {
-        return foundation::URL::fileURLWithPath(path).absoluteString();
+        return values::URL::fileURLWithPath(path).absoluteString();
     }
     /// One line fewer than a good staple, and status 73.
     testing::Matcher<const ProcessResult&> CouldNotBeWritten(const std::string& path) const {
@@ -147,7 +147,7 @@ TEST_F(Bundle, MayHaveANameThatIsNoURLText) {
     std::filesystem::rename(bundle, named);
     const ProcessResult result = stapleVerbosely(named);
     EXPECT_THAT(result, Ended(0, AllOf(Contains("Processing: " + named), Contains(kWorked))));
-    EXPECT_EQ(readFile(named + "/Contents/CodeResources"), foundation::toString(genuine));
+    EXPECT_EQ(readFile(named + "/Contents/CodeResources"), base::toString(genuine));
 }
 
 TEST_F(Bundle, ItsNameCannotDriveTheTerminal) {

@@ -116,7 +116,7 @@ TEST_F(CommandLine, QuietSaysNothingAtAll) {
         EXPECT_THAT(pinwell({"staple", option, bundle}), Ended(0, IsEmpty())) << option;
         EXPECT_THAT(pinwell({"staple", option, missing()}), Ended(66, IsEmpty())) << option;
     }
-    EXPECT_EQ(stapled(), foundation::toData(readFile(temporaryPath("REQUEST.ticket"))));
+    EXPECT_EQ(stapled(), base::toData(readFile(temporaryPath("REQUEST.ticket"))));
 }
 
 TEST_F(CommandLine, OptionsAfterThePathCountInEveryEnvironment) {
@@ -224,8 +224,7 @@ TEST_F(CommandLine, AVerboseRunPrintsEveryStepInOrder) {
     std::vector<std::string> steps;  // dictionaries take more than one line; their members are indented
     for (const std::string& line : result.outputLines())
         if (!line.starts_with("  ") && line != "}" && line != ")") steps.push_back(line);
-    const std::string stored =
-        foundation::URL::fileURLWithPath(temporaryPath("REQUEST.ticket")).absoluteString();
+    const std::string stored = values::URL::fileURLWithPath(temporaryPath("REQUEST.ticket")).absoluteString();
     const auto size = std::to_string(inlineRecord(ticket()).size());
     EXPECT_THAT(steps,
                 ElementsAre(processing(), "Properties are {", "Props are {", "JSON Data is {", " Headers: {",

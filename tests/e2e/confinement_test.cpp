@@ -11,8 +11,8 @@
 #include <sstream>
 #include <string>
 
-#include "foundation/sanitized.h"
 #include "local_service.h"
+#include "runtime/process.h"
 #include "support/file_properties.h"
 
 namespace pinwell::test {
@@ -26,7 +26,7 @@ using Attempts = std::map<std::string, int>;  // by name, with the errno of each
 class Intruded : public LocalServiceTest {
   protected:
     void SetUp() override {
-        if (foundation::kSanitized) GTEST_SKIP() << "a sanitized program takes no library before its own";
+        if (runtime::kSanitized) GTEST_SKIP() << "a sanitized program takes no library before its own";
         if (syscall(SYS_landlock_create_ruleset, nullptr, 0, 1) < 4)
             GTEST_SKIP() << "this kernel has no Landlock that knows TCP";
         writeFile(secret, kSecret);

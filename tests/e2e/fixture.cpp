@@ -5,7 +5,7 @@
 #include <filesystem>
 #include <ostream>
 
-#include "foundation/base64.h"
+#include "base/text.h"
 
 namespace pinwell::test {
 
@@ -40,7 +40,7 @@ Response answer(std::string body) {
 
 std::string inlineRecord(const Data& ticket) {
     return R"({"records":[{"recordName":"any","fields":{"signedTicket":{"type":"BYTES","value":")" +
-           foundation::encodeBase64(ticket) + R"("}}}]})";
+           base::encodeBase64(ticket) + R"("}}}]})";
 }
 
 std::string assetRecord(const std::string& urlTemplate, const std::string& size) {
@@ -114,7 +114,7 @@ Matcher<std::string> EndToEndTest::DownloadFailed(const std::string& reason) con
 }
 
 void EndToEndTest::trust(const IssuedCertificate& certificate, const std::string& store) {
-    const std::string name = foundation::toHex(codeDigest(2, certificate.der)) + ".pem";
+    const std::string name = base::toHex(codeDigest(2, certificate.der)) + ".pem";
     writeFile(directory / ("platform/" + store + "/" + name), certificate.pem());
 }
 
@@ -152,8 +152,7 @@ void EndToEndTest::serveAsset(const std::string& record, const Response& asset) 
 }
 
 void EndToEndTest::serveAsset(const Data& ticket) {
-    serveAsset(assetRecord(service().url("/assets/${f}"), ticket.size()),
-               {.body = foundation::toString(ticket)});
+    serveAsset(assetRecord(service().url("/assets/${f}"), ticket.size()), {.body = base::toString(ticket)});
 }
 
 TicketPayloadBuilder EndToEndTest::payload() const {
@@ -166,7 +165,7 @@ Data EndToEndTest::sealed(const TicketPayloadBuilder& payload) const {
 
 std::optional<Data> EndToEndTest::stapled() const {
     if (!std::filesystem::is_regular_file(std::filesystem::symlink_status(ticketPath()))) return std::nullopt;
-    return foundation::toData(readFile(ticketPath()));
+    return base::toData(readFile(ticketPath()));
 }
 
 std::vector<std::string> EndToEndTest::namesBelow(const std::string& path) {

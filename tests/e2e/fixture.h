@@ -18,7 +18,8 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
+#include "base/text.h"
 #include "support/certificate_builder.h"
 #include "support/code_directory_builder.h"
 #include "support/executable_image_builder.h"
@@ -29,7 +30,7 @@
 
 namespace pinwell::test {
 
-using foundation::Data;
+using base::Data;
 
 /// Shown when an expectation about a run fails.
 void PrintTo(const ProcessResult& result, std::ostream* out);
@@ -86,7 +87,7 @@ class EndToEndTest : public testing::Test {
     // The lines of every run.
 
     std::string processing() const { return "Processing: " + bundle; }
-    std::string prettyHash() const { return "2/" + foundation::toHex(hash); }
+    std::string prettyHash() const { return "2/" + base::toHex(hash); }
     std::string noTicketLine() const {
         return "Could not find base64 encoded ticket in response for " + prettyHash();
     }

@@ -12,21 +12,21 @@
 #include <stdexcept>
 #include <thread>
 
+#include "base/byte_io.h"
+#include "base/handle.h"
 #include "browser.h"
-#include "foundation/byte_reader.h"
-#include "foundation/file_io.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
 #include "gate_fixture.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::FileDescriptor;
-using foundation::Value;
+using base::FileDescriptor;
 using testing::AllOf;
 using testing::HasSubstr;
 using testing::Not;
+using values::Value;
 
 /// A server on loopback without contents, which counts connections.
 class EmptyServer {
@@ -105,7 +105,7 @@ class GatePage : public GateRun {
     /// A row of the page for each check of the run that failed.
     std::vector<std::string> rowsOfFailedChecks(const std::vector<std::string>& paths) const {
         const std::string report = gate({"--offline", "--format", "json"}, paths).output;
-        const auto document = foundation::parseJSON(foundation::asBytes(report));
+        const auto document = values::parseJSON(base::asBytes(report));
         std::vector<std::string> rows;
         for (const Value& result : *(*document)["results"].array())
             for (const Value& check : *result["checks"].array())
@@ -141,7 +141,7 @@ TEST_F(GatePage, CanBePictured) {
     const std::string bytes = readFile(picture);
     ASSERT_GT(bytes.size(), 1000U);  // a blank one has fewer
     EXPECT_EQ(bytes.substr(1, 3), "PNG");
-    foundation::ByteReader reader(foundation::asBytes(bytes));
+    base::ByteReader reader(base::asBytes(bytes));
     reader.seek(16, "width");
     EXPECT_EQ(reader.be32("width"), 800U);
     EXPECT_EQ(reader.be32("height"), 600U);

@@ -4,23 +4,23 @@
 #include <filesystem>
 #include <map>
 
-#include "foundation/json.h"
-#include "foundation/value.h"
-#include "foundation/xml_parser.h"
 #include "gate_fixture.h"
 #include "schema_validation.h"
 #include "support/file_properties.h"
+#include "values/json.h"
+#include "values/value.h"
+#include "values/xml_parser.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::Value;
 using testing::AllOf;
 using testing::Contains;
 using testing::HasSubstr;
 using testing::IsEmpty;
 using testing::Not;
 using testing::StartsWith;
+using values::Value;
 
 class GateReport : public GateRun {
   protected:
@@ -55,7 +55,7 @@ class GateReport : public GateRun {
 };
 
 const Value parsed(const std::string& text) {
-    const auto document = foundation::parseJSON(foundation::asBytes(text));
+    const auto document = values::parseJSON(base::asBytes(text));
     EXPECT_TRUE(document.has_value()) << text;
     return document ? *document : Value();
 }
@@ -68,7 +68,7 @@ TEST_F(GateReport, ReportsInJson) {
     flip(application() + "/Contents/Resources/ReadMe.txt", 0);
     const ProcessResult result = gate({"--format", "json", "--offline"}, {image(), application()});
     EXPECT_EQ(result.exitStatus, 65);
-    const auto document = foundation::parseJSON(foundation::asBytes(result.output));
+    const auto document = values::parseJSON(base::asBytes(result.output));
     ASSERT_TRUE(document.has_value()) << result.output;
     EXPECT_EQ((*document)["version"].unsignedIntegerValue(), 1U);
     const auto* const results = (*document)["results"].array();
@@ -170,8 +170,8 @@ TEST_F(GateReport, NamesPathsInSarifByPercentEncoding) {
 
 TEST_F(GateReport, IsWellFormedXmlInJUnit) {
     const std::vector<std::string> paths = oddlyNamed();
-    struct Suites : foundation::XMLEvents {
-        void begin(std::string_view name, const foundation::XMLAttributes&) override {
+    struct Suites : values::XMLEvents {
+        void begin(std::string_view name, const values::XMLAttributes&) override {
             suites += name == "testsuite" ? 1U : 0U;
         }
         void end(std::string_view) override {}
@@ -179,9 +179,9 @@ TEST_F(GateReport, IsWellFormedXmlInJUnit) {
         std::size_t suites = 0;
     } events;
     const std::string report = reportIn("junit", paths);
-    foundation::XMLParser parser(events, foundation::XMLParser::DocumentType::refused);
+    values::XMLParser parser(events, values::XMLParser::DocumentType::refused);
     EXPECT_NO_THROW({
-        parser.feed(foundation::asBytes(report));
+        parser.feed(base::asBytes(report));
         parser.finish();
     }) << report;
     EXPECT_EQ(events.suites, paths.size());

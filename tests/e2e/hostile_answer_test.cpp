@@ -91,7 +91,7 @@ TEST_F(HostileAnswer, AnUnrequestedProtocolSwitchIsRefused) {
 
 /// 80 MiB of blanks, more than the limit of a response, in some 80 kB.
 const std::string& zlibBomb() {
-    static const std::string bomb = foundation::toString(deflated(std::string(std::size_t{80} << 20U, ' ')));
+    static const std::string bomb = base::toString(deflated(std::string(std::size_t{80} << 20U, ' ')));
     return bomb;
 }
 std::string gzipBomb() {
@@ -251,7 +251,7 @@ TEST_F(HostileAnswer, AnAssetURLWithoutAHostIsNone) {
 
 TEST_F(HostileAnswer, ASizeOfAnotherKindIsNone) {
     const std::string got = std::to_string(genuine.size());
-    const Response asset{.body = foundation::toString(genuine)};
+    const Response asset{.body = base::toString(genuine)};
     const std::vector<std::pair<std::string, std::string>> printable{
         {'"' + got + '"', got}, {"null", "<null>"}, {"\"\"", ""}, {"\"\\u001b[2J\"", "\\x1b[2J"}};
     for (const auto& [size, printed] : printable) {
@@ -278,7 +278,7 @@ TEST_F(HostileAnswer, ASizeOfAnotherKindIsNone) {
 TEST_F(HostileAnswer, ASizeOfManyPartsIsNone) {
     const std::string got = std::to_string(genuine.size());
     for (const std::string& size : {"[" + got + "]", "{\"size\":" + got + "}"}) {
-        serveAsset(assetRecord(service().url("/${f}"), size), {.body = foundation::toString(genuine)});
+        serveAsset(assetRecord(service().url("/${f}"), size), {.body = base::toString(genuine)});
         const ProcessResult result = staple();
         EXPECT_EQ(result.exitStatus, 65) << size;
         EXPECT_EQ(result.outputLines().back(), stapleFailed(65)) << size;
@@ -294,7 +294,7 @@ TEST_F(HostileAnswer, ASizeThatIsNoJSONIsRefused) {
 
 TEST_F(HostileAnswer, AFractionalSizeIsCutToItsWholePart) {
     serveAsset(assetRecord(service().url("/${f}"), std::to_string(genuine.size()) + ".9"),
-               {.body = foundation::toString(genuine)});
+               {.body = base::toString(genuine)});
     EXPECT_THAT(staple(), Worked());
 }
 

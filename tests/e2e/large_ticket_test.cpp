@@ -71,14 +71,14 @@ TEST_F(LargeTicket, CompletesAValidation) {
 // The template.
 
 TEST_F(LargeTicket, EveryTokenOfTheTemplateIsReplaced) {
-    const Response asset{.body = foundation::toString(genuine)};
+    const Response asset{.body = base::toString(genuine)};
     serveAsset(assetRecord(service().url("/${f}/x/${f}?n=${f}"), genuine.size()), asset);
     EXPECT_THAT(staple(), Worked());
     EXPECT_EQ(service().requests().back().target, "/lmasset.ticket/x/lmasset.ticket?n=lmasset.ticket");
 }
 
 TEST_F(LargeTicket, ATemplateWithoutTheTokenIsUsedAsItIs) {
-    const Response asset{.body = foundation::toString(genuine)};
+    const Response asset{.body = base::toString(genuine)};
     serveAsset(assetRecord(service().url("/plain?a=$f"), genuine.size()), asset);
     EXPECT_THAT(staple(), Worked());
     EXPECT_EQ(service().requests().back().target, "/plain?a=$f");
@@ -97,7 +97,7 @@ TEST_F(LargeTicket, ATemplateThatMakesNoURLIsReportedAndNoTicketIsFound) {
 // Size, then status.
 
 TEST_F(LargeTicket, OfAnotherSizeThanAnnouncedIsRefused) {
-    const Response asset{.body = foundation::toString(genuine)};
+    const Response asset{.body = base::toString(genuine)};
     for (const std::size_t announced : {genuine.size() - 1, genuine.size() + 1, std::size_t{0}}) {
         serveAsset(assetRecord(service().url("/${f}"), announced), asset);
         EXPECT_THAT(staple(),
@@ -108,14 +108,14 @@ TEST_F(LargeTicket, OfAnotherSizeThanAnnouncedIsRefused) {
 }
 
 TEST_F(LargeTicket, WithoutAnAnnouncedSizeIsRefused) {
-    serveAsset(assetRecord(service().url("/${f}"), ""), {.body = foundation::toString(genuine)});
+    serveAsset(assetRecord(service().url("/${f}"), ""), {.body = base::toString(genuine)});
     EXPECT_THAT(staple(),
                 Ended(65, ElementsAre(processing(), sizeLine("(null)", genuine.size()), stapleFailed(65))));
 }
 
 TEST_F(LargeTicket, ASizeThatIsNoNumberIsRefused) {
     const std::size_t got = genuine.size();
-    const Response asset{.body = foundation::toString(genuine)};
+    const Response asset{.body = base::toString(genuine)};
     serveAsset(assetRecord(service().url("/${f}"), "-1"), asset);
     EXPECT_THAT(staple(), Ended(65, ElementsAre(processing(), sizeLine("-1", got), stapleFailed(65))));
     serveAsset(assetRecord(service().url("/${f}"), "1e300"), asset);
@@ -132,7 +132,7 @@ TEST_F(LargeTicket, AMissingAssetOfAnotherSizeIsAMatterOfSize) {
 
 TEST_F(LargeTicket, AnErrorOfTheAnnouncedSizeIsAMatterOfStatus) {
     serveAsset(assetRecord(service().url("/${f}"), genuine.size()),
-               {.status = 500, .body = foundation::toString(genuine)});
+               {.status = 500, .body = base::toString(genuine)});
     EXPECT_THAT(
         staple(),
         Ended(68,
@@ -170,8 +170,7 @@ TEST_F(LargeTicket, ThatIsRevokedIsReported) {
 
 TEST_F(LargeTicket, MayComeFromAnotherHostWithACertificateOfItsOwn) {
     HostileServer assets(identityOf(ServerChain("localhost").issue()));
-    assets.setHandler(
-        [this](const RecordedRequest&) { return Response{.body = foundation::toString(genuine)}; });
+    assets.setHandler([this](const RecordedRequest&) { return Response{.body = base::toString(genuine)}; });
     serveAsset(assetRecord(assets.url("/${f}", "localhost"), genuine.size()), {.status = 404});
     EXPECT_THAT(
         pinwell({"staple", "-v", bundle}),
@@ -183,7 +182,7 @@ TEST_F(LargeTicket, MayBeRedirected) {
     service().enqueue(Script().respond(answer(assetRecord(service().url("/${f}"), genuine.size()))));
     service().enqueue(
         Script().respond({.status = 302, .headers = {{"Location", "/there"}}, .body = "moved"}));
-    service().enqueue(Script().respond({.body = foundation::toString(genuine)}));
+    service().enqueue(Script().respond({.body = base::toString(genuine)}));
     EXPECT_THAT(staple(), Worked());
 }
 

@@ -3,8 +3,8 @@
 
 #include <filesystem>
 
+#include "base/text.h"
 #include "fixture.h"
-#include "foundation/base64.h"
 
 namespace pinwell::test {
 namespace {
@@ -48,7 +48,7 @@ TEST_F(Lookup, IsOnePostOfTheRecordName) {
     const RecordedRequest request = service().requests()[0];
     EXPECT_EQ(request.method, "POST");
     EXPECT_EQ(request.target, "/database/1/com.ostrel.tm.ticket-delivery/production/public/records/lookup");
-    EXPECT_EQ(request.body, R"({"records":[{"recordName":"2/2/)" + foundation::toHex(hash) + R"("}]})");
+    EXPECT_EQ(request.body, R"({"records":[{"recordName":"2/2/)" + base::toHex(hash) + R"("}]})");
     EXPECT_EQ(request.header("Content-Type"), "application/json");
     EXPECT_EQ(request.header("User-Agent"), "pinwell/34.0");
     EXPECT_EQ(request.header("Host"), "127.0.0.1:" + std::to_string(service().port()));
@@ -66,7 +66,7 @@ TEST_F(Lookup, NamesTheStrongestCodeDirectoryOfTheBundle) {
     serveTicket(sealed(TicketPayloadBuilder().hashLength(48).entry(4, strongest)));
     EXPECT_THAT(staple(), Ended(0, ElementsAre(processing(), processing(), kWorked)));
     EXPECT_EQ(service().requests()[0].body,
-              R"({"records":[{"recordName":"2/4/)" + foundation::toHex(strongest) + R"("}]})");
+              R"({"records":[{"recordName":"2/4/)" + base::toHex(strongest) + R"("}]})");
 }
 
 TEST_F(Lookup, TakesTheServicesHostByName) {
@@ -255,7 +255,7 @@ TEST_F(Lookup, AnEmptyDownloadURLIsNone) {
 // Inline tickets.
 
 TEST_F(Lookup, ATicketThatIsNotStrictBase64IsNone) {
-    std::string wrapped = foundation::encodeBase64(ticket());
+    std::string wrapped = base::encodeBase64(ticket());
     wrapped.insert(76, R"(\r\n)");  // as JSON writes a line break
     for (const std::string& text : {std::string("?"), std::string("QUJD="), std::string("QUI"),
                                     std::string("QUJ-"), std::string(" QUJD"), std::string(), wrapped}) {
@@ -268,10 +268,10 @@ TEST_F(Lookup, ATicketThatIsNotStrictBase64IsNone) {
 
 TEST_F(Lookup, AnInlineTicketIsPreferredToAnAsset) {
     const std::string url = service().url("/${f}");
-    EXPECT_THAT(stapleWith(R"({"records":[{"fields":{"signedTicketAsset":{"value":{"downloadURL":")" + url +
-                           R"(","size":7}},"signedTicket":{"value":")" + foundation::encodeBase64(ticket()) +
-                           R"("}}}]})"),
-                Ended(0, ElementsAre(processing(), processing(), kWorked)));
+    EXPECT_THAT(
+        stapleWith(R"({"records":[{"fields":{"signedTicketAsset":{"value":{"downloadURL":")" + url +
+                   R"(","size":7}},"signedTicket":{"value":")" + base::encodeBase64(ticket()) + R"("}}}]})"),
+        Ended(0, ElementsAre(processing(), processing(), kWorked)));
     EXPECT_EQ(service().requests().size(), 1U);
 }
 
@@ -281,7 +281,7 @@ TEST_F(Lookup, TheRequestIdentifierNamesTheTicketFile) {
     serveTicket(ticket());
     ASSERT_EQ(staple().exitStatus, 0);
     EXPECT_THAT(temporaryFiles(), ElementsAre("REQUEST.ticket"));
-    EXPECT_EQ(readFile(temporaryPath("REQUEST.ticket")), foundation::toString(*stapled()));
+    EXPECT_EQ(readFile(temporaryPath("REQUEST.ticket")), base::toString(*stapled()));
     struct stat status {};
     ASSERT_EQ(stat(temporaryPath("REQUEST.ticket").c_str(), &status), 0);
     EXPECT_EQ(status.st_mode & 07777U, 0600U);
@@ -372,7 +372,7 @@ TEST_F(Lookup, AStapledTicketThatIsRevokedEndsTheRun) {
 
 TEST_F(Lookup, AStapledTicketThatIsRefusedEndsTheRunInSilence) {
     service();
-    for (const Data& stapledTicket : {ticketForOthers(), foundation::toData("garbage"), Data(1)}) {
+    for (const Data& stapledTicket : {ticketForOthers(), base::toData("garbage"), Data(1)}) {
         stapleByHand(stapledTicket);
         EXPECT_THAT(validate(), Ended(65, ElementsAre(processing())));
     }

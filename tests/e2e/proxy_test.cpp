@@ -4,8 +4,8 @@
 
 #include <stdexcept>
 
+#include "base/handle.h"
 #include "fixture.h"
-#include "foundation/file_io.h"
 
 namespace pinwell::test {
 namespace {
@@ -19,7 +19,7 @@ using testing::Not;
 
 /// A port of the loopback address that was free a moment ago.
 std::uint16_t freePort() {
-    const foundation::FileDescriptor socket(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    const base::FileDescriptor socket(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
     sockaddr_in address{};
     address.sin_family = AF_INET;
     address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);

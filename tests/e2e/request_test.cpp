@@ -5,9 +5,9 @@
 #include <csignal>
 #include <filesystem>
 
+#include "base/text.h"
 #include "batch_fixture.h"
-#include "foundation/base64.h"
-#include "foundation/json.h"
+#include "values/json.h"
 
 namespace pinwell::test {
 namespace {
@@ -50,7 +50,7 @@ class TicketRequest : public BatchTest {
     }
     Response answerTo(const RecordedRequest& request) const {
         const std::lock_guard lock(serving);
-        const auto body = foundation::parseJSON(foundation::asBytes(request.body));
+        const auto body = values::parseJSON(base::asBytes(request.body));
         const std::string& name = *(*body)["record"].string();
         const auto found = records.find(name);
         if (found == records.end() || !found->second)
@@ -62,8 +62,7 @@ class TicketRequest : public BatchTest {
                 .body = R"({"record":")" + name +
                         R"(","label":"x","environment":"production","action":"issued",)"
                         R"("ticket":")" +
-                        foundation::encodeBase64(*found->second) + R"(","event":")" + std::string(64, 'e') +
-                        "\"}"};
+                        base::encodeBase64(*found->second) + R"(","event":")" + std::string(64, 'e') + "\"}"};
     }
 
     std::vector<std::string> withService(std::vector<std::string> arguments) {
@@ -101,7 +100,7 @@ TEST_F(TicketRequest, KeepsTheTicketsThatTheServiceIssues) {
     EXPECT_EQ(*reportsOf(result).at(0)["action"].string(), "issued");
     expectValid(result);
     for (const Artefact& one : artefacts) {
-        EXPECT_EQ(foundation::toData(readFile(kept(one))), issuedFor(one));
+        EXPECT_EQ(base::toData(readFile(kept(one))), issuedFor(one));
         EXPECT_EQ(readFile(one.file()), one.contents);
     }
     EXPECT_THAT(service().requests(), SizeIs(4));

@@ -17,8 +17,8 @@ using testing::Matcher;
 using testing::Not;
 using testing::StartsWith;
 
-constexpr foundation::Date kLongAgo{1600000000};
-constexpr foundation::Date kFarAhead{2500000000};
+constexpr values::Date kLongAgo{1600000000};
+constexpr values::Date kFarAhead{2500000000};
 
 Matcher<std::string> evaluation(int verdict, const std::string& reason = {}) {
     return AllOf(StartsWith("Certificate trust evaluation did not return expected result. (" +

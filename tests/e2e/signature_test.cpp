@@ -80,7 +80,7 @@ TEST_F(Signature, ASignatureThatDoesNotVerifyGivesNoHash) {
     replaceBundle(imageSignedWith(codeDirectory, CmsBuilder(codeDirectory).brokenSignature().build()),
                   codeDirectory);
     EXPECT_THAT(stapleVerbosely(), HasNoHash());
-    replaceBundle(imageSignedWith(codeDirectory, foundation::toData("not a message")), codeDirectory);
+    replaceBundle(imageSignedWith(codeDirectory, base::toData("not a message")), codeDirectory);
     EXPECT_THAT(stapleVerbosely(), HasNoHash());
     EXPECT_THAT(service().connections(), testing::IsEmpty());
 }
@@ -94,7 +94,7 @@ TEST_F(Signature, ASignatureThatIsNeitherSignedNorAdHocGivesNoHash) {
 TEST_F(Signature, AScriptsBundleKeepsItsSignatureInFilesOfTheirOwn) {
     const Data codeDirectory = CodeDirectoryBuilder().covers(2, emptyRequirements()).build();
     BundleBuilder()
-        .executable(foundation::toData("#!/bin/sh\n"))
+        .executable(base::toData("#!/bin/sh\n"))
         .separateSignature(codeDirectory, emptyRequirements(), {})
         .write(bundle);
     serveTicket(ticket());

@@ -21,7 +21,7 @@ class Streams : public EndToEndTest {
         EXPECT_EQ(result.errors, "");
         EXPECT_EQ(stapled(), genuine);
         EXPECT_THAT(temporaryFiles(), ElementsAre("REQUEST.ticket"));
-        EXPECT_EQ(readFile(temporaryPath("REQUEST.ticket")), foundation::toString(genuine));
+        EXPECT_EQ(readFile(temporaryPath("REQUEST.ticket")), base::toString(genuine));
         ASSERT_EQ(service().requests().size(), 1U);
         EXPECT_EQ(service().requests()[0].body,
                   R"({"records":[{"recordName":")" + ("2/" + prettyHash()) + R"("}]})");
@@ -94,8 +94,8 @@ TEST_F(Streams, ALargeTicketOnAClosedOutputIsWhole) {
     const std::string url = service().url("/${f}");
     const std::string record = R"({"records":[{"fields":{"signedTicketAsset":{"value":{"downloadURL":")" +
                                url + R"(","size":)" + std::to_string(genuine.size()) + "}}}}]}";
-    const Response asset{
-        .body = foundation::toString(genuine)};  // a copy: the server outlives this class's members
+    const Response asset{.body =
+                             base::toString(genuine)};  // a copy: the server outlives this class's members
     service().setHandler([record, asset](const RecordedRequest& request) {
         return request.method == "POST" ? answer(record) : asset;
     });

@@ -7,9 +7,9 @@
 #include <filesystem>
 
 #include "batch_fixture.h"
-#include "foundation/json.h"
 #include "schema_validation.h"
 #include "support/package_builder.h"
+#include "values/json.h"
 
 namespace pinwell::test {
 namespace {
@@ -54,7 +54,7 @@ class TicketTool : public BatchTest {
     static void expectValid(const ProcessResult& result) { BatchTest::expectValid(result, TICKET_SCHEMA); }
     void expectIndexValid() const { expectConforms(readFile(tickets + "/index.json"), TICKET_INDEX_SCHEMA); }
     Value indexEntries() const {
-        const auto index = foundation::parseJSON(foundation::asBytes(readFile(tickets + "/index.json")));
+        const auto index = values::parseJSON(base::asBytes(readFile(tickets + "/index.json")));
         return index ? (*index)["tickets"] : Value();
     }
 
@@ -75,7 +75,7 @@ TEST_F(TicketTool, HashPrintsRecordNamesWithoutANetwork) {
 
 TEST_F(TicketTool, HashReportsArtefactsWithoutAHash) {
     const auto images = writeImages(1);
-    BundleBuilder().executable(foundation::toData("#!/bin/sh\n")).write(directory / "builds/Unsigned.app");
+    BundleBuilder().executable(base::toData("#!/bin/sh\n")).write(directory / "builds/Unsigned.app");
     writeFile(directory / "builds/plain.txt", "text");
     const ProcessResult result =
         ticketTool({"hash", "--json", images[0].path, directory / "builds/Unsigned.app",
@@ -103,7 +103,7 @@ TEST_F(TicketTool, FetchKeepsTicketsByRecordNameAndByPath) {
     expectIndexValid();
     EXPECT_THAT(*indexEntries().array(), SizeIs(4));
     for (const Artefact& one : artefacts) {
-        EXPECT_EQ(foundation::toData(readFile(tickets + "/" + fileNameOf(one))), issuedFor(one));
+        EXPECT_EQ(base::toData(readFile(tickets + "/" + fileNameOf(one))), issuedFor(one));
         EXPECT_EQ(readFile(one.file()), one.contents);
     }
     EXPECT_THAT(groupSizes(), ElementsAre(4U));
@@ -134,7 +134,7 @@ TEST_F(TicketTool, FetchKeepsATicketThatRevokesAndEndsWith77) {
     const Value entries = indexEntries();
     for (const Value& entry : *entries.array()) revoked += entry["revoked"].boolValue() ? 1U : 0U;
     EXPECT_EQ(revoked, 1U);
-    EXPECT_EQ(foundation::toData(readFile(tickets + "/" + fileNameOf(images[1]))),
+    EXPECT_EQ(base::toData(readFile(tickets + "/" + fileNameOf(images[1]))),
               records.at(recordNameOf(images[1])));
 }
 
@@ -235,7 +235,7 @@ TEST_F(TicketTool, FetchLooksEachRecordUpAloneIfGroupsGetNoResponse) {
     EXPECT_EQ(tool({"fetch", "-q", "--out", tickets}, images).exitStatus, 0);
     EXPECT_THAT(groupSizes(), ElementsAre(4U, 1U, 1U, 1U, 1U));
     for (const Artefact& one : images)
-        EXPECT_EQ(foundation::toData(readFile(tickets + "/" + fileNameOf(one))), issuedFor(one));
+        EXPECT_EQ(base::toData(readFile(tickets + "/" + fileNameOf(one))), issuedFor(one));
 }
 
 TEST_F(TicketTool, FetchOverwritesNoIndexThatItCannotRead) {
@@ -273,7 +273,7 @@ TEST_F(TicketTool, FetchNeverWritesThroughALink) {
     std::filesystem::create_symlink("../precious", tickets + "/index.json.tmp");
     EXPECT_EQ(tool({"fetch", "-q", "--out", tickets}, images).exitStatus, 0);
     EXPECT_EQ(readFile(directory / "builds/precious"), "precious");
-    EXPECT_EQ(foundation::toData(readFile(tickets + "/" + fileNameOf(images[0]))), issuedFor(images[0]));
+    EXPECT_EQ(base::toData(readFile(tickets + "/" + fileNameOf(images[0]))), issuedFor(images[0]));
 }
 
 // Attaching.
@@ -356,7 +356,7 @@ TEST_F(TicketTool, ExtractWritesTheTicketOfEveryKind) {
         EXPECT_THAT(reportsOf(result), ElementsAre(Reports("worked", 0)));
         EXPECT_EQ(*reportsOf(result)[0]["file"].string(), fileNameOf(one));
         expectValid(result);
-        EXPECT_EQ(foundation::toData(readFile(directory / ("builds/" + fileNameOf(one)))), issuedFor(one));
+        EXPECT_EQ(base::toData(readFile(directory / ("builds/" + fileNameOf(one)))), issuedFor(one));
     }
 }
 
@@ -422,10 +422,8 @@ TEST_F(TicketTool, APackageIsAsBeforeItsFirstStapleAfterARemove) {
 
 TEST_F(TicketTool, TrailersOfOthersOutliveARemoveAndKeepATicketOut) {
     const Artefact package = signedPackage();
-    const std::string ticket = foundation::toString(ticketOf(package));
-    const auto bare = [&] {
-        return PackageBuilder().archive(foundation::toData(package.contents)).terminator();
-    };
+    const std::string ticket = base::toString(ticketOf(package));
+    const auto bare = [&] { return PackageBuilder().archive(base::toData(package.contents)).terminator(); };
     writeFile(directory / "builds/Signed.pkg", bare().unknown("others").ticket(ticket).build());
     const ProcessResult removed = ticketTool({"remove", "Signed.pkg"});
     EXPECT_EQ(removed.exitStatus, 0);
@@ -436,7 +434,7 @@ TEST_F(TicketTool, TrailersOfOthersOutliveARemoveAndKeepATicketOut) {
     EXPECT_EQ(readFile(directory / "builds/Signed.pkg"), left);
 
     writeFile(directory / "ticket", ticket);
-    serveTicket(foundation::toData(ticket));
+    serveTicket(base::toData(ticket));
     for (const std::string& contents : {left, bare().build()}) {
         writeFile(directory / "builds/Signed.pkg", contents);
         const ProcessResult attached = ticketTool({"attach", "--ticket", directory / "ticket", "Signed.pkg"});
@@ -561,8 +559,8 @@ TEST_F(TicketTool, AMissingTemporaryDirectoryIsReported) {
 }
 
 TEST_F(TicketTool, OddNamesArePrintedInOneLine) {
-    const Artefact image = writeArtefact(unsignedImage(foundation::toData("odd")),
-                                         directory / "builds/many/odd\n\x1b[31mname.dmg");
+    const Artefact image =
+        writeArtefact(unsignedImage(base::toData("odd")), directory / "builds/many/odd\n\x1b[31mname.dmg");
     const ProcessResult result = ticketTool({"hash", image.path});
     EXPECT_THAT(result.outputLines(),
                 ElementsAre(AllOf(HasSubstr("odd\\n"), testing::Not(HasSubstr("\x1b")))));

@@ -1,7 +1,7 @@
 // Failures between the tool and the record service: broken connections, responses of excessive length,
 // redirects.
 #include "fixture.h"
-#include "foundation/format.h"
+#include "values/format.h"
 
 namespace pinwell::test {
 namespace {
@@ -105,14 +105,14 @@ TEST_F(Transport, AResponseByteByByteIsAccepted) {
 TEST_F(Transport, AResponseInChunksIsAccepted) {
     std::string chunks;
     for (std::size_t at = 0; at < body.size(); at += 15)
-        chunks += foundation::format("%x\r\n", static_cast<std::uint32_t>(body.substr(at, 15).size())) +
+        chunks += values::format("%x\r\n", static_cast<std::uint32_t>(body.substr(at, 15).size())) +
                   body.substr(at, 15) + "\r\n";
     const std::string chunkedHead = "HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n";
     EXPECT_THAT(stapleFrom(Script().readRequest().send(chunkedHead + chunks + "0\r\n\r\n")), Worked());
 }
 
 TEST_F(Transport, AResponseWithoutItsLastChunkIsRefused) {
-    const std::string chunk = foundation::format("%zx\r\n", body.size()) + body + "\r\n";
+    const std::string chunk = values::format("%zx\r\n", body.size()) + body + "\r\n";
     EXPECT_THAT(stapleFrom(Script()
                                .readRequest()
                                .send("HTTP/1.1 200 OK\r\nTransfer-Encoding: chunked\r\n\r\n" + chunk)

@@ -19,8 +19,8 @@
 #include <system_error>
 
 #include "artefacts.h"
+#include "base/handle.h"
 #include "fixture.h"
-#include "foundation/file_io.h"
 #include "support/file_properties.h"
 
 namespace pinwell::test {
@@ -45,7 +45,7 @@ struct Place {
 };
 
 Place placeOf(const std::string& path, std::uint64_t offset) {
-    const foundation::FileDescriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+    const base::FileDescriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));
     alignas(fiemap) std::array<std::byte, sizeof(fiemap) + sizeof(fiemap_extent)> room{};
     fiemap& map = *new (room.data()) fiemap;
     map.fm_start = offset;
@@ -259,7 +259,7 @@ class FullVolume : public Volumes {
   private:
     /// Takes all space but kRoom.
     void fill() const {
-        const foundation::FileDescriptor file(
+        const base::FileDescriptor file(
             open((volume / "filling").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600));
         off_t taken = 0;
         for (off_t piece = 256 * 1024 * 1024; piece >= static_cast<off_t>(kBlock); piece /= 2)
@@ -302,7 +302,7 @@ using FullVolumeWithABundle = FullVolume;
 TEST_P(FullVolumeWithABundle, HasNoTicketRatherThanHalfOfOne) {
     EXPECT_THAT(stapleArtefact(), FailedToWrite());
     EXPECT_FALSE(exists(artefact.file()));
-    EXPECT_EQ(foundation::toData(readFile(artefact.path + "/Contents/Programs/Sample")), artefact.executable);
+    EXPECT_EQ(base::toData(readFile(artefact.path + "/Contents/Programs/Sample")), artefact.executable);
     EXPECT_THAT(names(), ElementsAre(artefact.name, "filling"));
 }
 

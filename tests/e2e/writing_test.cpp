@@ -8,8 +8,8 @@
 #include <vector>
 
 #include "artefacts.h"
+#include "base/handle.h"
 #include "fixture.h"
-#include "foundation/file_io.h"
 
 namespace pinwell::test {
 namespace {
@@ -76,7 +76,7 @@ TEST_P(SharedArtefact, IsStapledByOneAfterTheOther) {
 }
 
 TEST_P(SharedArtefact, ThatAnotherHasLockedIsStapledWhenItIsFree) {
-    foundation::FileDescriptor locked(open(artefact.path.c_str(), O_RDONLY | O_CLOEXEC));
+    base::FileDescriptor locked(open(artefact.path.c_str(), O_RDONLY | O_CLOEXEC));
     ASSERT_EQ(flock(locked.get(), LOCK_EX), 0);
     RunningProcess staple(command({"staple", artefact.path}));
     // A reader does not wait.

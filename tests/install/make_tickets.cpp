@@ -20,17 +20,18 @@ int main(int count, char** arguments) {
         SatchelBuilder::of(chain, TicketPayloadBuilder().entry(2, hashOf(7)).build());
     const Data ticket = sound.build();
     const Data forged = SatchelBuilder(sound).signedBy(SigningKey::cached(KeyKind::p256, "forger")).build();
-    const std::string text = foundation::toString(ticket);
+    const std::string text = base::toString(ticket);
 
     writeFile(folder + "roots.pem", chain.root.pem());
     writeFile(folder + "platform/roots/root.pem", chain.root.pem());
-    writeFile(folder + "genuine.ticket", foundation::ByteView(ticket));
-    writeFile(folder + "forged.ticket", foundation::ByteView(forged));
-    writeFile(folder + "truncated.ticket", foundation::ByteView(ticket).first(ticket.size() / 2));
-    writeFile(folder + "genuine.dmg", foundation::ByteView(DiskImageBuilder()
-                                                               .superblob(DiskImageBuilder::signature().blob(
-                                                                   kSampleTicketSlot, ticketBlob(text)))
-                                                               .build()));
+    writeFile(folder + "genuine.ticket", base::ByteView(ticket));
+    writeFile(folder + "forged.ticket", base::ByteView(forged));
+    writeFile(folder + "truncated.ticket", base::ByteView(ticket).first(ticket.size() / 2));
+    writeFile(
+        folder + "genuine.dmg",
+        base::ByteView(DiskImageBuilder()
+                           .superblob(DiskImageBuilder::signature().blob(kSampleTicketSlot, ticketBlob(text)))
+                           .build()));
     writeFile(folder + "genuine.pkg", PackageBuilder().terminator().ticket(text).build());
     writeFile(folder + "bare.pkg", PackageBuilder().build());
 }

@@ -2,9 +2,9 @@
 
 #include <filesystem>
 
+#include "base/byte_io.h"
+#include "base/bytes.h"
 #include "e2e/artefacts.h"
-#include "foundation/byte_writer.h"
-#include "foundation/bytes.h"
 #include "support/archive_builder.h"
 #include "support/disk_image_builder.h"
 #include "support/executable_image_builder.h"
@@ -14,7 +14,7 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::ByteView;
+using base::ByteView;
 using I = IssuedChain;
 using Path = const std::string&;
 
@@ -27,10 +27,10 @@ constexpr std::size_t kOwnData = 1000;
 // Images.
 
 std::string imageTicket(const I& i) {
-    return foundation::toString(goodTicket(subjectNamed("signedImage"), i));
+    return base::toString(goodTicket(subjectNamed("signedImage"), i));
 }
 std::string forgedTicket() {
-    return foundation::toString(goodTicket(subjectNamed("package"), TicketChain().issue()));
+    return base::toString(goodTicket(subjectNamed("package"), TicketChain().issue()));
 }
 Data blobOf(const I& i) {
     return ticketBlob(imageTicket(i));
@@ -79,7 +79,7 @@ std::vector<ImageFault> imageFaults() {
         {"NoTicket", "no ticket is stapled to it", kRefused, [](const I&) { return imageOf(DiskImageBuilder::signature()).build(); }},
         {"TwoTicketsTheEarlierForged", "nothing: of two tickets the later one counts, and it is good", kAccepted, [](const I& i) { return imageOf(DiskImageBuilder::signature().blob(kSampleTicketSlot, ticketBlob(forgedTicket())).blob(kSampleTicketSlot, blobOf(i))).build(); }},
         {"TicketInAnotherSlot", "the ticket stands in another slot", kRefused, [](const I& i) { return imageOf(DiskImageBuilder::signature().blob(0x10003, blobOf(i))).build(); }},
-        {"TicketOfAnotherMagic", "nothing: the slot says what the blob is, its magic is not looked at", kAccepted, [](const I& i) { return imageOf(DiskImageBuilder::signature().blob(kSampleTicketSlot, makeBlob(0xFADE0C01, foundation::asBytes(imageTicket(i))))).build(); }},
+        {"TicketOfAnotherMagic", "nothing: the slot says what the blob is, its magic is not looked at", kAccepted, [](const I& i) { return imageOf(DiskImageBuilder::signature().blob(kSampleTicketSlot, makeBlob(0xFADE0C01, base::asBytes(imageTicket(i))))).build(); }},
         {"TwoTicketsTheLaterForged", "two tickets, and the later one counts: it is another signer's", kRefused, [](const I& i) { return imageOf(stapled(i).blob(kSampleTicketSlot, ticketBlob(forgedTicket()))).build(); }},
         {"TicketEmpty", "a ticket of no byte", kRefused, [](const I&) { return imageOf(DiskImageBuilder::signature().blob(kSampleTicketSlot, ticketBlob(""))).build(); }},
         {"TicketShared", "two index entries, one blob", kUnusable, [](const I& i) { return imageOf(stapled(i).blob(0x10003, makeBlob(0xFADE0B01, {})).offsetOf(0x10003, ticketOffset(i) + 8)).build(); }},
@@ -109,7 +109,7 @@ std::vector<ImageFault> imageFaults() {
         {"FirstByteMissing", "the image's first byte is missing", kUnusable, [](const I& i) { return removed(imageOf(stapled(i)).build(), 0); }},
         {"LastByteMissing", "the trailer's last byte is missing", kUnusable, [](const I& i) { const Data image = imageOf(stapled(i)).build(); return removed(image, image.size() - 1); }},
         {"TrailerAlone", "nothing but the trailer", kUnusable, [](const I& i) { return imageOf(stapled(i)).trailer(); }},
-        {"TrailerTwice", "the trailer twice", kUnusable, [](const I& i) { Data image = imageOf(stapled(i)).build(); foundation::append(image, imageOf(stapled(i)).trailer()); return image; }},
+        {"TrailerTwice", "the trailer twice", kUnusable, [](const I& i) { Data image = imageOf(stapled(i)).build(); base::append(image, imageOf(stapled(i)).trailer()); return image; }},
         {"TrailerMagic", "the trailer has another magic", kUnusable, [](const I& i) { return imageOf(stapled(i)).magic("kolz").build(); }},
         {"TrailerVersion3", "a trailer of version 3", kUnusable, [](const I& i) { return imageOf(stapled(i)).version(3).build(); }},
         {"TrailerVersion5", "a trailer of version 5", kUnusable, [](const I& i) { return imageOf(stapled(i)).version(5).build(); }},
@@ -147,7 +147,7 @@ TrailerFields ticketRecord() {
 std::string withRecordLength(const std::string& ticket, std::uint32_t length) {
     TrailerFields fields = ticketRecord();
     fields.length = length;
-    return package().terminator().trailer(fields, foundation::toData(ticket)).build();
+    return package().terminator().trailer(fields, base::toData(ticket)).build();
 }
 std::uint32_t sizeOf(const std::string& ticket) {
     return static_cast<std::uint32_t>(ticket.size());
@@ -155,7 +155,7 @@ std::uint32_t sizeOf(const std::string& ticket) {
 std::string withRecord(const std::string& ticket, const std::function<void(TrailerFields&)>& change) {
     TrailerFields fields = ticketRecord();
     change(fields);
-    return package().terminator().trailer(fields, foundation::toData(ticket)).build();
+    return package().terminator().trailer(fields, base::toData(ticket)).build();
 }
 std::string good(const std::string& ticket) {
     return package().terminator().ticket(ticket).build();
@@ -240,9 +240,9 @@ std::vector<ArchiveFault> archiveFaults() {
         {"NoAlgorithmAndNoElement", "neither header nor table speak of a checksum", [] { return forged().algorithm(0).checksumElement("").signature("CMS"); }},
         {"NoAlgorithmAndTheOtherSignature", "the header names no algorithm, the signature is of the newer element", [] { return forged().algorithm(0).checksumElement(checksum("none", kPlace)).element("<x-signature style='CMS'/>"); }},
         {"NoAlgorithmAndAnEmptyStyle", "the header names no algorithm, the style is empty", [] { return forged().algorithm(0).checksumElement(checksum("", kPlace)).signature("CMS"); }},
-        {"AlgorithmCalledNone", "the header has the name of an algorithm, and it is none", [] { return forged().algorithm(3).headerTail(foundation::toData(std::string_view("none\0\0\0", 8))).checksumElement(checksum("none", kPlace)).signature("CMS"); }},
+        {"AlgorithmCalledNone", "the header has the name of an algorithm, and it is none", [] { return forged().algorithm(3).headerTail(base::toData(std::string_view("none\0\0\0", 8))).checksumElement(checksum("none", kPlace)).signature("CMS"); }},
         {"AlgorithmWithoutAName", "the header has an empty name for its algorithm", [] { return forged().algorithm(3).headerTail(Data(8)).checksumElement(checksum("", kPlace)).signature("CMS"); }},
-        {"AlgorithmInCapitals", "the name of the header's algorithm is in capitals", [] { return otherArchive().digest("sha256").algorithm(3).headerTail(foundation::toData(std::string_view("SHA256\0\0", 8))).signature("CMS"); }},
+        {"AlgorithmInCapitals", "the name of the header's algorithm is in capitals", [] { return otherArchive().digest("sha256").algorithm(3).headerTail(base::toData(std::string_view("SHA256\0\0", 8))).signature("CMS"); }},
         {"AlgorithmUnknown", "the header's algorithm is one that nobody knows", [] { return forged().algorithm(77).signature("CMS"); }},
         {"StyleInCapitals", "the checksum's style is in capitals", [] { return otherArchive().checksumStyle("SHA1").signature("CMS"); }},
         {"StyleOfAnother", "the checksum's style is not the header's", [] { return otherArchive().checksumStyle("sha256").signature("CMS"); }},
@@ -309,7 +309,7 @@ std::vector<ArtefactFault> bundleFaults() {
         {"Unsigned", "the program carries no signature", bundle, kUnusable, [](Path p, const I& i) { writeBundle(p, ExecutableImageBuilder().withoutSignature().build(), i); }},
         {"NoProgram", "no program is there", bundle, kUnusable, [](Path p, const I& i) { writeGood(p, i); std::filesystem::remove(p + "/Contents/Programs/Sample"); }},
         {"ProgramEmpty", "a program of no byte", bundle, kUnusable, [](Path p, const I& i) { writeBundle(p, {}, i); }},
-        {"ProgramIsAText", "a script in the place of the program", bundle, kUnusable, [](Path p, const I& i) { writeBundle(p, foundation::toData("#!/bin/sh\n"), i); }},
+        {"ProgramIsAText", "a script in the place of the program", bundle, kUnusable, [](Path p, const I& i) { writeBundle(p, base::toData("#!/bin/sh\n"), i); }},
         {"SignatureMagic", "the signature has another magic", bundle, kUnusable, [](Path p, const I& i) { writeBundle(p, ExecutableImageBuilder().signature(SuperBlobBuilder::adHoc().magic(0xFADE0CC1).build()).build(), i); }},
         {"SignatureBehindTheEnd", "the signature is said to lie behind the program's end", bundle, kUnusable, [](Path p, const I& i) { writeBundle(p, ExecutableImageBuilder().signatureOffset(kMaximum - 16).build(), i); }},
         {"SignatureLengthZero", "a signature of no length", bundle, kUnusable, [](Path p, const I& i) { writeBundle(p, ExecutableImageBuilder().signatureLength(0).build(), i); }},
@@ -338,7 +338,7 @@ std::vector<ArtefactFault> artefactFaults() {
                               writeFile(path, PackageBuilder()
                                                   .archive(make().build())
                                                   .terminator()
-                                                  .ticket(foundation::toString(ticket))
+                                                  .ticket(base::toString(ticket))
                                                   .build());
                           }});
     }
@@ -346,7 +346,7 @@ std::vector<ArtefactFault> artefactFaults() {
         faults.push_back({std::string("Package") + fault.name, fault.wrong, "package", fault.exit,
                           [make = fault.make](Path path, const I& i) {
                               const Data ticket = goodTicket(subjectNamed("package"), i);
-                              writeFile(path, make(foundation::toString(ticket)));
+                              writeFile(path, make(base::toString(ticket)));
                           }});
     }
     return faults;

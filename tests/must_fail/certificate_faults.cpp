@@ -139,10 +139,10 @@ const std::vector<CertificateFault>& certificateFaults() {
         {"NameNotInUtf8", "a name that is not in UTF-8", "xxx xxx xxx", [](C& c, Chain&) { c.edit = [](E& e) { e.subject = bytes({0x30, 12, 0x31, 10, 0x30, 8, 6, 3, 0x55, 4, 3, 0x0C, 1, 0xE9}); }; }},
         {"NameOfHalfACharacter", "a name of 16-bit characters and a half", "xxx xxx xxx", [](C& c, Chain&) { c.edit = [](E& e) { e.subject = bytes({0x30, 12, 0x31, 10, 0x30, 8, 6, 3, 0x55, 4, 3, 0x1E, 1, 'a'}); }; }},
         {"CriticalAsAOne", "an extension whose critical flag is 1 instead of 255", "xxx xxx xxx", [](C& c, Chain&) { c.edit = [](E& e) { e.extensions = bytes({0xA3, 13, 0x30, 11, 0x30, 9, 6, 2, 0x2A, 3, 1, 1, 1, 4, 0}); }; }},
-        {"ExtensionsTwice", "two lists of extensions", "xxx xxx xxx", [](C& c, Chain&) { c.edit = [](E& e) { foundation::append(e.extensions, Data(e.extensions)); }; }},
+        {"ExtensionsTwice", "two lists of extensions", "xxx xxx xxx", [](C& c, Chain&) { c.edit = [](E& e) { base::append(e.extensions, Data(e.extensions)); }; }},
         {"KeyWithUnusedBits", "a public key with unused bits", "xxx xxx xxx", [](C& c, Chain&) { c.edit = [](E& e) { e.key = bytes({0x30, 10, 0x30, 4, 6, 2, 0x2A, 3, 3, 2, 4, 0x70}); }; }},
         {"SignatureWithUnusedBits", "a signature with unused bits", "xxx xxx xxx", [](C& c, Chain&) { c.edit = [](E& e) { e.signature = bytes({3, 2, 4, 0xF0}); }; }},
-        {"ElementBehindTheLast", "an element behind the extensions", "xxx xxx xxx", [](C& c, Chain&) { c.edit = [](E& e) { foundation::append(e.extensions, bytes({5, 0})); }; }},
+        {"ElementBehindTheLast", "an element behind the extensions", "xxx xxx xxx", [](C& c, Chain&) { c.edit = [](E& e) { base::append(e.extensions, bytes({5, 0})); }; }},
         {"GiantIdentifier", "an extension whose identifier has 100,000 bytes", "xxx xxx xxx", [](C& c, Chain&) { c.edit = [](E& e) { e.extensions = derElement(0xA3, derElement(0x30, derElement(0x30, joined(derElement(6, Data(100000, std::byte{1})), bytes({4, 0}))))); }; }},
         {"TooManyExtensions", "an extension a thousand times", "xxx xxx xxx", [](C& c, Chain&) { for (int i = 0; i < 1000; ++i) replace(c, ("1.2.3." + std::to_string(i)).c_str(), false); }},
         // Versions and serial numbers.

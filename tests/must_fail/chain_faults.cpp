@@ -103,7 +103,7 @@ Data renewed(const Scene& scene, const ChainFields& fields, Position position) {
 }
 
 /// The leaf issued again with its key in another form.
-Data leafWithKey(const Scene& scene, const ChainFields& fields, Data (*form)(foundation::ByteView)) {
+Data leafWithKey(const Scene& scene, const ChainFields& fields, Data (*form)(base::ByteView)) {
     CertificateFields leaf = fields.leaf;
     leaf.serial += 100;
     leaf.edit = [form](CertificateElements& all) { all.key = form(all.key); };
@@ -152,13 +152,13 @@ void namesakes(Scene& scene, const ChainFields& fields) {
 
 /// That many names of the leaf below that many constraints of the root, which all permit the host.
 void crossNames(ChainFields& chain, int nameCount, int constraintCount) {
-    const Data host = derElement(0x82, foundation::asBytes(kHost));
+    const Data host = derElement(0x82, base::asBytes(kHost));
     Data all;
-    for (int i = 0; i < nameCount; ++i) foundation::append(all, host);
+    for (int i = 0; i < nameCount; ++i) base::append(all, host);
     chain.leaf.subjectAlternativeNames.clear();
     replace(chain.leaf, kAlternativeNames, false, derElement(0x30, all));
     Data subtrees;
-    for (int i = 0; i < constraintCount; ++i) foundation::append(subtrees, derElement(0x30, host));
+    for (int i = 0; i < constraintCount; ++i) base::append(subtrees, derElement(0x30, host));
     replace(chain.root, kNameConstraints, false, derElement(0x30, derElement(0xA0, subtrees)));
 }
 
@@ -169,8 +169,7 @@ void names(ChainFields& chain, const char* words) {
 /// One general name, byte for byte.
 void rawName(ChainFields& chain, std::uint8_t tag, std::string_view text) {
     chain.leaf.subjectAlternativeNames.clear();
-    replace(chain.leaf, kAlternativeNames, false,
-            derElement(0x30, derElement(tag, foundation::asBytes(text))));
+    replace(chain.leaf, kAlternativeNames, false, derElement(0x30, derElement(tag, base::asBytes(text))));
 }
 constexpr std::uint8_t kDnsName = 0x82;
 constexpr std::uint8_t kAddress = 0x87;
@@ -294,7 +293,7 @@ const std::vector<ChainFault>& chainFaults() {
         {"WildcardOverTheExcludedHost", "a wildcard covers the host, which is excluded", "- 5 5", [](Chain& c) { names(c, "DNS:*.lumora.example"); c.root.nameConstraints = "excluded;DNS:api.lumora.example"; }},
         {"WildcardWiderThanPermitted", "a wildcard covers more than the host that is permitted", "- 5 5", [](Chain& c) { names(c, "DNS:*.lumora.example"); c.root.nameConstraints = "permitted;DNS:api.lumora.example"; }},
         {"NameOfTheIntermediateExcluded", "the root excludes a name of the intermediate", "- 5 5", [](Chain& c) { c.intermediate.subjectAlternativeNames = "DNS:evil.example"; c.root.nameConstraints = "permitted;DNS:lumora.example"; }},
-        {"NameWithNulBelowAConstraint", "a name with a NUL besides the host, below a constraint", "- 5 5", [](Chain& c) { c.leaf.subjectAlternativeNames.clear(); replace(c.leaf, kAlternativeNames, false, derElement(0x30, joined(derElement(kDnsName, foundation::asBytes(kHost)), derElement(kDnsName, foundation::asBytes(std::string_view("a\0.lumora.example", 17)))))); c.root.nameConstraints = "permitted;DNS:lumora.example"; }},
+        {"NameWithNulBelowAConstraint", "a name with a NUL besides the host, below a constraint", "- 5 5", [](Chain& c) { c.leaf.subjectAlternativeNames.clear(); replace(c.leaf, kAlternativeNames, false, derElement(0x30, joined(derElement(kDnsName, base::asBytes(kHost)), derElement(kDnsName, base::asBytes(std::string_view("a\0.lumora.example", 17)))))); c.root.nameConstraints = "permitted;DNS:lumora.example"; }},
         {"TooManyNames", "four thousand names below a thousand constraints", "- 5 5", [](Chain& c) { crossNames(c, 4000, 1000); }},
         {"NameOfEightBits", "a DNS name that is not of 7-bit characters", "- 6 6", [](Chain& c) { rawName(c, kDnsName, "caf\xE9.example"); }},
         {"NameOfAnUnknownForm", "a name of a form that there is not", "- 6 6", [](Chain& c) { rawName(c, 0x89, "api.lumora.example"); }},

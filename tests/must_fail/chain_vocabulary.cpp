@@ -15,7 +15,7 @@ Data bytes(std::initializer_list<int> values) {
 
 Data joined(const Data& first, const Data& second) {
     Data all = first;
-    foundation::append(all, second);
+    base::append(all, second);
     return all;
 }
 
@@ -27,8 +27,8 @@ Data number(std::size_t size, int last) {
 }
 
 Data dates(std::string_view from, std::string_view until) {
-    return derElement(0x30, joined(derElement(0x17, foundation::asBytes(from)),
-                                   derElement(0x17, foundation::asBytes(until))));
+    return derElement(0x30,
+                      joined(derElement(0x17, base::asBytes(from)), derElement(0x17, base::asBytes(until))));
 }
 
 void replace(CertificateFields& c, const char* oid, bool critical, Data value) {

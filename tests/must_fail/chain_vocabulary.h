@@ -5,7 +5,7 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "support/certificate_builder.h"
 #include "unit/trust/scene.h"
 
@@ -17,14 +17,14 @@ struct CertificateFault {
     const char* wrong;
     const char* verdicts;
     std::function<void(CertificateFields&, ChainFields&)> fields;
-    std::function<void(foundation::Data&)> der = nullptr;  // changes the certificate in the list
+    std::function<void(base::Data&)> der = nullptr;  // changes the certificate in the list
 };
 
 const std::vector<CertificateFault>& certificateFaults();
 
 namespace faults {
 
-using foundation::Data;
+using base::Data;
 
 inline constexpr const char* kBasicConstraints = "2.5.29.19";
 inline constexpr const char* kKeyUsage = "2.5.29.15";

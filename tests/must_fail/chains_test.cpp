@@ -42,10 +42,10 @@ trust::PolicyRef makePolicy(const ChainCase& one, trust::TrustService& service) 
 }
 
 /// Returns `nullopt` if one of them cannot be read.
-std::optional<std::vector<trust::CertificateRef>> parse(const std::vector<foundation::Data>& list,
+std::optional<std::vector<trust::CertificateRef>> parse(const std::vector<base::Data>& list,
                                                         trust::TrustService& service) {
     std::vector<trust::CertificateRef> certificates;
-    for (const foundation::Data& der : list) {
+    for (const base::Data& der : list) {
         certificates.push_back(service.parseCertificate(der));
         if (certificates.back() == nullptr) return std::nullopt;
     }

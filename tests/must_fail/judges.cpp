@@ -2,13 +2,13 @@
 
 #include <algorithm>
 
-#include "foundation/date.h"
 #include "gate/case.h"
 #include "inspect/gather.h"
 #include "library/assessment.h"
 #include "library/c_calls.h"
 #include "src/messages.h"
 #include "support/certificate_builder.h"
+#include "values/date.h"
 
 namespace pinwell::test {
 namespace {
@@ -54,7 +54,7 @@ Judges::Judges(const SignerAnchors& anchors) : codeSigning_(codesign::makeCodeSi
     writeAnchors(directory + "/user-trust/allow", anchors.allowed);
     writeAnchors(directory + "/user-trust/deny", anchors.denied);
     trust_ = trust::makeTrustService(
-        platform_.platformDirectory, [](std::string_view) {}, [] { return foundation::Date{kNow}; });
+        platform_.platformDirectory, [](std::string_view) {}, [] { return values::Date{kNow}; });
 }
 
 Platform Judges::services() {

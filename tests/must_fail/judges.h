@@ -8,7 +8,7 @@
 #include <ostream>
 #include <string>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "subjects.h"
 #include "support/test_platform.h"
 

@@ -7,8 +7,8 @@
 #include <map>
 #include <tuple>
 
+#include "base/bytes.h"
 #include "e2e/artefacts.h"
-#include "foundation/bytes.h"
 #include "result_table.h"
 #include "subjects.h"
 #include "support/code_directory_builder.h"
@@ -74,14 +74,14 @@ void application(const std::string& path) {
 void separatelySigned(const std::string& path) {
     BundleBuilder()
         .executableName("tool")
-        .executable(foundation::toData("#!/bin/sh\n"))
+        .executable(base::toData("#!/bin/sh\n"))
         .separateSignature(directoryBlob(), emptyRequirements(), {})
         .write(path);
 }
 void framework(const std::string& path) {
     const Data executable = image();
     // A directory where others have a link: after a move it still leads to the executable.
-    writeFile(path + "/Versions/Current/Sample", foundation::ByteView(executable));
+    writeFile(path + "/Versions/Current/Sample", base::ByteView(executable));
 }
 
 struct Part {
@@ -151,7 +151,7 @@ class LinkTable : public testing::TestWithParam<std::tuple<Part, Form>> {
         fs::create_directory(outside_);
         part().write(bundle_);
         const Data ticket = good();
-        writeFile(bundle_ + "/Contents/CodeResources", foundation::ByteView(ticket));
+        writeFile(bundle_ + "/Contents/CodeResources", base::ByteView(ticket));
     }
 
     static const Part& part() { return std::get<Part>(GetParam()); }

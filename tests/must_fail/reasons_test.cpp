@@ -61,7 +61,7 @@ class Maker {
     }
     Offset image(const DiskImageBuilder& builder, Offset at) {
         use(subjectNamed("signedImage"));
-        writeFile(path_, foundation::ByteView(builder.build()));
+        writeFile(path_, base::ByteView(builder.build()));
         return at;
     }
     Offset package(const PackageBuilder& builder, Offset at) {
@@ -113,7 +113,7 @@ Data withByteAfter(Data data) {
 }
 void writeAtEnd(const std::string& path, const Data& bytes) {
     std::ofstream file(path, std::ios::binary | std::ios::app);
-    file << foundation::toString(bytes);
+    file << base::toString(bytes);
 }
 /// The record of a ticket in which one thing is wrong.
 TrailerFields recordWith(const std::function<void(TrailerFields&)>& change) {
@@ -123,14 +123,13 @@ TrailerFields recordWith(const std::function<void(TrailerFields&)>& change) {
     return fields;
 }
 PackageBuilder archive() {
-    return PackageBuilder().archive(
-        foundation::toData(foundation::asBytes(signedPackage(irregularData(1000)).contents)));
+    return PackageBuilder().archive(base::toData(base::asBytes(signedPackage(irregularData(1000)).contents)));
 }
 DiskImageBuilder imageOf(const SuperBlobBuilder& superblob) {
     return DiskImageBuilder().data(irregularData(kImageData)).superblob(superblob);
 }
 SuperBlobBuilder stapled(const Data& ticket) {
-    return DiskImageBuilder::signature().blob(kSampleTicketSlot, ticketBlob(foundation::toString(ticket)));
+    return DiskImageBuilder::signature().blob(kSampleTicketSlot, ticketBlob(base::toString(ticket)));
 }
 std::uint64_t trailerOf(const DiskImageBuilder& image) {
     return image.build().size() - kTrailer;
@@ -201,14 +200,14 @@ std::vector<Row> imageRows() {
         {"EmptyTicket", "noTicket", "No ticket is stapled to it.", "", [](Maker& m) { return m.image(imageOf(stapled(Data())), {}); }},
         {"TooShort", "unreadable", kNoneReadable, "the file is too small for a disk image's trailer", [](Maker& m) { m.artefact("signedImage"); writeFile(m.path(), std::string_view("short")); return Offset(0); }},
         {"TrailerMagic", "unreadable", kNoneReadable, "the file does not end in a disk image's trailer", [](Maker& m) { const auto i = imageOf(stapled(m.goodFor("signedImage"))).magic("kolz"); return m.image(i, trailerOf(i)); }},
-        {"ByteAfterTheTrailer", "unreadable", kNoneReadable, "the file does not end in a disk image's trailer", [](Maker& m) { const auto i = imageOf(stapled(m.goodFor("signedImage"))); m.image(i, {}); writeFile(m.path(), foundation::ByteView(withByteAfter(i.build()))); return Offset(trailerOf(i) + 1); }},
+        {"ByteAfterTheTrailer", "unreadable", kNoneReadable, "the file does not end in a disk image's trailer", [](Maker& m) { const auto i = imageOf(stapled(m.goodFor("signedImage"))); m.image(i, {}); writeFile(m.path(), base::ByteView(withByteAfter(i.build()))); return Offset(trailerOf(i) + 1); }},
         {"TrailerVersion", "unreadable", kNoneReadable, "the trailer's version is not 4", [](Maker& m) { const auto i = imageOf(stapled(m.goodFor("signedImage"))).version(5); return m.image(i, trailerOf(i) + 4); }},
         {"SignatureOutOfRange", "unreadable", kNoneReadable, "the signature's offset and length are out of range", [](Maker& m) { const auto i = imageOf(stapled(m.goodFor("signedImage"))).codeSignOffset(~0ULL); return m.image(i, trailerOf(i) + 296); }},
         {"SignatureElsewhere", "unreadable", kNoneReadable, "the signature does not end where the trailer begins", [](Maker& m) { const auto i = imageOf(stapled(m.goodFor("signedImage"))).codeSignOffset(kImageData + 1); return m.image(i, trailerOf(i) + 296); }},
         {"SuperblobMagic", "unreadable", kNoneReadable, "the superblob does not begin with its magic", [](Maker& m) { return m.image(imageOf(stapled(m.goodFor("signedImage")).magic(0xFADE0CC1)), kImageData); }},
         {"SuperblobLength", "unreadable", kNoneReadable, "the superblob's length is not the one in the trailer", [](Maker& m) { return m.image(imageOf(stapled(m.goodFor("signedImage")).length(7)), kImageData + 4); }},
         {"SuperblobCount", "unreadable", kNoneReadable, "the superblob counts more blobs than it has room for", [](Maker& m) { return m.image(imageOf(stapled(m.goodFor("signedImage")).count(0xFFFFFFFF)), kImageData + 8); }},
-        {"GapBetweenBlobs", "unreadable", kNoneReadable, "the blobs do not fill the superblob back to back", [](Maker& m) { return m.image(imageOf(DiskImageBuilder::signature().gap(8).blob(kSampleTicketSlot, ticketBlob(foundation::toString(m.goodFor("signedImage"))))), kImageData + 12); }},
+        {"GapBetweenBlobs", "unreadable", kNoneReadable, "the blobs do not fill the superblob back to back", [](Maker& m) { return m.image(imageOf(DiskImageBuilder::signature().gap(8).blob(kSampleTicketSlot, ticketBlob(base::toString(m.goodFor("signedImage"))))), kImageData + 12); }},
         {"TicketsVersion", "refused", kNotAcceptable, "the container's version is not 1", [](Maker& m) { const auto i = imageOf(stapled(m.around(m.payload()).version(2).build())); return m.image(i, trailerOf(i) - m.good().size() + 4); }},
         {"OfAnother", "refused", kNotAcceptable, "the ticket does not list this artefact", [](Maker& m) { const auto i = imageOf(stapled(m.good())); return m.image(i, trailerOf(i) - kSignature - m.payload().build().size() + 24); }},
     };
@@ -222,20 +221,20 @@ std::vector<Row> packageRows() {
         };
     };
     return {
-        {"Good", "good", "Its ticket is good.", "", [](Maker& m) { return m.package(archive().terminator().ticket(foundation::toString(m.goodFor("package"))), {}); }},
+        {"Good", "good", "Its ticket is good.", "", [](Maker& m) { return m.package(archive().terminator().ticket(base::toString(m.goodFor("package"))), {}); }},
         {"NoTicket", "noTicket", "No ticket is stapled to it.", "", [](Maker& m) { return m.package(archive(), {}); }},
         {"TerminatorAlone", "noTicket", "No ticket is stapled to it.", "", [](Maker& m) { return m.package(archive().terminator(), {}); }},
         {"EmptyTicket", "noTicket", "No ticket is stapled to it.", "", [](Maker& m) { return m.package(archive().terminator().ticket(""), {}); }},
-        {"ByteAfterTheRecord", "noTicket", "No ticket is stapled to it.", "", [](Maker& m) { return m.package(archive().terminator().ticket(foundation::toString(m.goodFor("package"))).bytes("x"), {}); }},
+        {"ByteAfterTheRecord", "noTicket", "No ticket is stapled to it.", "", [](Maker& m) { return m.package(archive().terminator().ticket(base::toString(m.goodFor("package"))).bytes("x"), {}); }},
         {"RecordVersion", "refused", kNoneReadable, "a trailer's version is not 1", record([](TrailerFields& f) { f.version = 2; })},
         {"RecordMagic", "refused", kNoneReadable, "a trailer does not begin with its magic, \"t8lr\"", record([](TrailerFields& f) { f.magic = "t8ls"; })},
         {"RecordOutOfBounds", "refused", kNoneReadable, "a trailer's data would begin before the file", record([](TrailerFields& f) { f.length = 0xFFFFFFFF; })},
         {"UnknownRecordOutOfBounds", "refused", kNoneReadable, "a trailer's data would begin before the file", record([](TrailerFields& f) { f.type = kUnknownTrailerType; f.length = 0x7FFFFFFF; })},
-        {"RecordVersionAfterTheTicket", "refused", kNoneReadable, "a trailer's version is not 1", [](Maker& m) { const auto p = archive().terminator().ticket(foundation::toString(m.goodFor("package"))).trailer(recordWith([](TrailerFields& f) { f.version = 2; })); return m.package(p, p.build().size() - kRecord); }},
-        {"TerminatorVersion", "good", "Its ticket is good.", "", [](Maker& m) { return m.package(archive().trailer(recordWith([](TrailerFields& f) { f.version = 2; f.type = 1; })).ticket(foundation::toString(m.goodFor("package"))), {}); }},
+        {"RecordVersionAfterTheTicket", "refused", kNoneReadable, "a trailer's version is not 1", [](Maker& m) { const auto p = archive().terminator().ticket(base::toString(m.goodFor("package"))).trailer(recordWith([](TrailerFields& f) { f.version = 2; })); return m.package(p, p.build().size() - kRecord); }},
+        {"TerminatorVersion", "good", "Its ticket is good.", "", [](Maker& m) { return m.package(archive().trailer(recordWith([](TrailerFields& f) { f.version = 2; f.type = 1; })).ticket(base::toString(m.goodFor("package"))), {}); }},
         {"TooLong", "refused", kNoneReadable, "the ticket is too long to be read", [](Maker& m) { m.package(archive(), {}); const auto start = std::filesystem::file_size(m.path()); const Data end = makeTrailer(recordWith([](TrailerFields& f) { f.length = static_cast<std::uint32_t>(kTooLong); })); std::filesystem::resize_file(m.path(), start + kTooLong); writeAtEnd(m.path(), end); return Offset(start); }},
-        {"TicketsVersion", "refused", kNotAcceptable, "the container's version is not 1", [](Maker& m) { const Data ticket = m.around(m.payload()).version(2).build(); const auto p = archive().terminator().ticket(foundation::toString(ticket)); return m.package(p, p.build().size() - kRecord - ticket.size() + 4); }},
-        {"OfAnother", "refused", kNotAcceptable, "the ticket does not list this artefact", [](Maker& m) { const auto p = archive().terminator().ticket(foundation::toString(m.good())); return m.package(p, p.build().size() - kRecord - kSignature - m.payload().build().size() + 24); }},
+        {"TicketsVersion", "refused", kNotAcceptable, "the container's version is not 1", [](Maker& m) { const Data ticket = m.around(m.payload()).version(2).build(); const auto p = archive().terminator().ticket(base::toString(ticket)); return m.package(p, p.build().size() - kRecord - ticket.size() + 4); }},
+        {"OfAnother", "refused", kNotAcceptable, "the ticket does not list this artefact", [](Maker& m) { const auto p = archive().terminator().ticket(base::toString(m.good())); return m.package(p, p.build().size() - kRecord - kSignature - m.payload().build().size() + 24); }},
     };
 }
 // clang-format on

@@ -1,6 +1,7 @@
 // Encodings of one published signature, all of them wrong but a few: RFC 6979, A.2.5, the message "test".
 #include <gtest/gtest.h>
 
+#include "base/text.h"
 #include "result_table.h"
 #include "support/certificate_builder.h"
 #include "trust/public_key.h"
@@ -9,8 +10,8 @@
 namespace pinwell::trust {
 namespace {
 
-using foundation::asBytes;
-using foundation::ByteWriter;
+using base::asBytes;
+using base::ByteWriter;
 
 const std::string kR(kTestR);
 const std::string kS(kTestS);
@@ -192,7 +193,7 @@ std::vector<SignatureCase> writtenCases() {
         {"Bare", "the integers without a sequence", contents()},
         {"Raw", "r and s, 32 bytes each", hex(kR + kS)},
         {"RawPadded", "r and s, 32 bytes each, and padding", padded(hex(kR + kS))},
-        {"Hexadecimal", "the signature in hexadecimal digits", foundation::toData(foundation::toHex(good()))},
+        {"Hexadecimal", "the signature in hexadecimal digits", base::toData(base::toHex(good()))},
     };
 }
 // clang-format on

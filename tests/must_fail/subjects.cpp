@@ -5,18 +5,18 @@
 #include <stdexcept>
 
 #include "e2e/artefacts.h"
-#include "foundation/date.h"
 #include "src/DownloadDelegate.h"
 #include "support/code_directory_builder.h"
 #include "support/controller_run.h"
 #include "support/executable_image_builder.h"
 #include "support/message_capture.h"
+#include "values/date.h"
 
 namespace pinwell::test {
 namespace {
 
-constexpr foundation::Date kNow{1795204500};  // 2026-11-20 19:55:00 UTC
-constexpr std::size_t kData = 1000;           // bytes of an artefact's own
+constexpr values::Date kNow{1795204500};  // 2026-11-20 19:55:00 UTC
+constexpr std::size_t kData = 1000;       // bytes of an artefact's own
 
 std::string ticketPath(const std::string& bundle) {
     return bundle + "/Contents/CodeResources";
@@ -31,7 +31,7 @@ Subject bundle() {
                 .executable(
                     ExecutableImageBuilder().signature(SuperBlobBuilder::adHoc(directory).build()).build())
                 .write(path);
-            if (ticket) writeFile(ticketPath(path), foundation::ByteView(*ticket));
+            if (ticket) writeFile(ticketPath(path), base::ByteView(*ticket));
         }};
 }
 

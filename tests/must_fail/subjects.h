@@ -10,14 +10,14 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "support/test_platform.h"
 #include "support/ticket_builder.h"
 #include "trust/trust_service.h"
 
 namespace pinwell::test {
 
-using foundation::Data;
+using base::Data;
 
 /// One possible artefact, with its ticket.
 struct Subject {

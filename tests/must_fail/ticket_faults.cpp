@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "foundation/base64.h"
+#include "base/text.h"
 
 namespace pinwell::test {
 namespace {
@@ -41,7 +41,7 @@ Data removed(Data data, std::size_t offset) {
     return data;
 }
 Data joined(Data first, const Data& second) {
-    foundation::append(first, second);
+    base::append(first, second);
     return first;
 }
 
@@ -178,7 +178,7 @@ const std::vector<TicketFault>& ticketFaults() {
         {"OneByte", "a single byte", kRefused, [](const S&, const I&) { return bytes({0x73}); }},
         {"Zeros", "a thousand zeros", kRefused, [](const S&, const I&) { return Data(1000); }},
         {"PayloadAlone", "the payload without its container", kRefused, [](const S& s, const I&) { return s.payload().build(); }},
-        {"InBase64", "the ticket in base64", kRefused, [](const S& s, const I& i) { return foundation::toData(foundation::encodeBase64(satchel(s, i).build())); }},
+        {"InBase64", "the ticket in base64", kRefused, [](const S& s, const I& i) { return base::toData(base::encodeBase64(satchel(s, i).build())); }},
         {"TwoTickets", "two genuine tickets end to end", kRefused, [](const S& s, const I& i) { return joined(satchel(s, i).build(), satchel(s, i).build()); }},
         {"TicketInATicket", "a genuine ticket as the payload of another", kRefused, [](const S& s, const I& i) { return SatchelBuilder::of(i, satchel(s, i).build()).build(); }},
         // The certificate block.

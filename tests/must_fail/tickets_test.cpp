@@ -2,7 +2,7 @@
 #include <gtest/gtest.h>
 
 #include "artefact_faults.h"
-#include "foundation/base64.h"
+#include "base/text.h"
 #include "result_table.h"
 #include "support/controller_run.h"
 #include "ticket_faults.h"
@@ -116,7 +116,7 @@ TEST_P(AnswerTable, EndsWithItsExitCode) {
 }
 
 std::string goodTicketInBase64() {
-    return foundation::encodeBase64(goodTicket(subjectNamed("package"), signers()));
+    return base::encodeBase64(goodTicket(subjectNamed("package"), signers()));
 }
 
 INSTANTIATE_TEST_SUITE_P(MustFail, AnswerTable, testing::ValuesIn(answerFaults(goodTicketInBase64())),

@@ -14,11 +14,11 @@
 #include <utility>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
+#include "base/bytes.h"
 #include "https/session.h"
 #include "src/platform.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::test {
 
@@ -28,7 +28,7 @@ class AnsweringSessions : public https::SessionService {
         int status = 200;
         https::Headers headers = {};
         std::string body = {};
-        std::optional<foundation::Error> error = {};
+        std::optional<base::Error> error = {};
         bool isByAStranger = false;  // the delegate gets the server's certificate, and must refuse it
         bool neverComes = false;     // it ends with the session
     };
@@ -36,7 +36,7 @@ class AnsweringSessions : public https::SessionService {
 
     explicit AnsweringSessions(Handler handler) : handler_(std::move(handler)) {}
 
-    foundation::Result<std::shared_ptr<https::Session>> ephemeralSession(
+    base::Result<std::shared_ptr<https::Session>> ephemeralSession(
         https::SessionDelegate& delegate) override {
         const std::lock_guard lock(mutex_);
         if (failure_) return *failure_;
@@ -45,7 +45,7 @@ class AnsweringSessions : public https::SessionService {
     }
 
     /// After this call, no session can be made.
-    void failWith(foundation::Error failure) {
+    void failWith(base::Error failure) {
         const std::lock_guard lock(mutex_);
         failure_ = std::move(failure);
     }
@@ -71,10 +71,10 @@ class AnsweringSessions : public https::SessionService {
     }
 
     static std::vector<std::string> namesIn(const https::Request& request) {
-        const auto body = foundation::parseJSON(request.body);
+        const auto body = values::parseJSON(request.body);
         std::vector<std::string> names;
         if (!body) return names;
-        for (const foundation::Value& record : *(*body)["records"].array())
+        for (const values::Value& record : *(*body)["records"].array())
             names.push_back(*record["recordName"].string());
         return names;
     }
@@ -112,15 +112,14 @@ class AnsweringSessions : public https::SessionService {
                 std::exchange(completion_, nullptr)(std::nullopt, std::nullopt, reply.error);
             } else {
                 std::exchange(completion_, nullptr)(
-                    foundation::toData(reply.body),
-                    https::HTTPResponse{*request_.url, reply.status, reply.headers}, std::nullopt);
+                    base::toData(reply.body), https::HTTPResponse{*request_.url, reply.status, reply.headers},
+                    std::nullopt);
             }
         }
         void fail(https::URLErrorCode code) {
             if (const auto completion = std::exchange(completion_, nullptr))
-                completion(
-                    std::nullopt, std::nullopt,
-                    foundation::Error(foundation::kURLErrorDomain, static_cast<std::int64_t>(code), "ended"));
+                completion(std::nullopt, std::nullopt,
+                           base::Error(base::kURLErrorDomain, static_cast<std::int64_t>(code), "ended"));
         }
         https::TaskState state() const override {
             return completion_ ? https::TaskState::running : https::TaskState::completed;
@@ -161,7 +160,7 @@ class AnsweringSessions : public https::SessionService {
 
     mutable std::mutex mutex_;
     Handler handler_;
-    std::optional<foundation::Error> failure_;
+    std::optional<base::Error> failure_;
     std::size_t sessions_ = 0;
     std::vector<https::Request> requests_;
 };

@@ -7,7 +7,7 @@
 #include <stdexcept>
 #include <vector>
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 
 namespace pinwell::test {
 namespace {
@@ -22,7 +22,7 @@ Data digestOf(const std::string& name, ByteView bytes) {
     if (algorithm == nullptr ||
         EVP_Digest(bytes.data(), bytes.size(), value.data(), &length, algorithm, nullptr) != 1)
         throw std::runtime_error("no digest " + name);
-    return foundation::toData(std::as_bytes(std::span(value)).first(length));
+    return base::toData(std::as_bytes(std::span(value)).first(length));
 }
 
 std::string elementOf(const std::string& name, const std::string& text) {
@@ -37,15 +37,15 @@ Data deflated(ByteView contents) {
     std::vector<Bytef> out(length);
     if (compress(out.data(), &length, reinterpret_cast<const Bytef*>(contents.data()), size) != Z_OK)
         throw std::runtime_error("cannot compress");
-    return foundation::toData(std::as_bytes(std::span(out)).first(length));
+    return base::toData(std::as_bytes(std::span(out)).first(length));
 }
 
 Data deflated(std::string_view contents) {
-    return deflated(foundation::asBytes(contents));
+    return deflated(base::asBytes(contents));
 }
 
 ArchiveBuilder& ArchiveBuilder::namedDigest(const std::string& name) {
-    foundation::ByteWriter tail;
+    base::ByteWriter tail;
     tail.text(name).zeros(4 - name.size() % 4);
     return digest(name).algorithm(3).headerTail(std::move(tail).take());
 }
@@ -99,7 +99,7 @@ std::uint32_t ArchiveBuilder::digestNumber() const {
 
 Data ArchiveBuilder::build() const {
     const Data toc = stream();
-    foundation::ByteWriter writer;
+    base::ByteWriter writer;
     writer.text(magic_);
     writer.be16(headerSize_.value_or(static_cast<std::uint16_t>(kFixedHeaderSize + headerTail_.size())));
     writer.be16(version_).be64(compressedLength_.value_or(toc.size()));

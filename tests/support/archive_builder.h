@@ -10,12 +10,12 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::test {
 
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteView;
+using base::Data;
 
 /// The zlib stream with these contents.
 Data deflated(ByteView contents);
@@ -105,7 +105,7 @@ class ArchiveBuilder {
     std::string elements_;
     std::optional<Data> checksum_;
     Data beforeChecksum_;
-    Data afterChecksum_ = foundation::toData("signature value, and the data of a file");
+    Data afterChecksum_ = base::toData("signature value, and the data of a file");
 };
 
 }  // namespace pinwell::test

@@ -15,8 +15,8 @@
 #include <map>
 #include <mutex>
 
-#include "foundation/byte_writer.h"
-#include "foundation/handle.h"
+#include "base/byte_io.h"
+#include "base/handle.h"
 #include "support/openssl_handles.h"
 #include "support/require.h"
 #include "support/ticket_builder.h"
@@ -25,11 +25,11 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::ByteView;
-using foundation::ByteWriter;
-using foundation::Data;
+using base::ByteView;
+using base::ByteWriter;
+using base::Data;
 
-using foundation::Handle;
+using base::Handle;
 
 using EcdsaHandle = Handle<ECDSA_SIG, ECDSA_SIG_free>;
 using NumberHandle = Handle<BIGNUM, BN_free>;
@@ -263,7 +263,7 @@ CertificateElements takeApart(ByteView certificate) {
         const auto element = trust::der::readElement(rest);
         require(element.has_value(), "a part of the certificate is missing");
         rest = rest.subspan(element->whole.size());
-        return foundation::toData(element->whole);
+        return base::toData(element->whole);
     };
     const auto takeIf = [&](std::uint8_t tag) {
         return !rest.empty() && rest.front() == std::byte{tag} ? take() : Data{};

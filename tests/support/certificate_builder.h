@@ -17,8 +17,8 @@
 #include <utility>
 #include <vector>
 
-#include "foundation/bytes.h"
-#include "foundation/date.h"
+#include "base/bytes.h"
+#include "values/date.h"
 
 struct evp_pkey_st;  // OpenSSL's EVP_PKEY
 
@@ -54,11 +54,11 @@ class SigningKey {
     std::string pem() const;
 
     /// The DER SubjectPublicKeyInfo.
-    foundation::Data publicKeyInfo() const;
+    base::Data publicKeyInfo() const;
 
     /// A signature over SHA-256 of the message: DER (X9.62) from an elliptic-curve key, PKCS #1 v1.5 from
     /// RSA.
-    foundation::Data sign(foundation::ByteView message) const;
+    base::Data sign(base::ByteView message) const;
 
     evp_pkey_st* native() const noexcept { return pair_.get(); }
 
@@ -84,7 +84,7 @@ struct BasicConstraints {
 struct ExtensionField {
     std::string oid;  // dotted
     bool critical = false;
-    foundation::Data value{std::byte{0x05}, std::byte{0x00}};  // DER; the default is a NULL
+    base::Data value{std::byte{0x05}, std::byte{0x00}};  // DER; the default is a NULL
 };
 
 /// MD5 needs an RSA issuer: ECDSA has no identifier for it.
@@ -100,31 +100,31 @@ struct PssDigests {
 struct KeyIdentifier {
     enum class Kind { computed, omitted, given };
     Kind kind = Kind::computed;
-    foundation::Data value = {};  // when given
+    base::Data value = {};  // when given
 
     static KeyIdentifier omitted() { return {Kind::omitted}; }
-    static KeyIdentifier given(std::string_view bytes) { return {Kind::given, foundation::toData(bytes)}; }
+    static KeyIdentifier given(std::string_view bytes) { return {Kind::given, base::toData(bytes)}; }
 };
 
 /// The parts of a certificate, each an encoded element; an empty one is left out. Tests edit these for forms
 /// that OpenSSL does not write.
 struct CertificateElements {
-    foundation::Data version;  // [0] and its contents
-    foundation::Data serialNumber;
-    foundation::Data innerAlgorithm;
-    foundation::Data issuer;
-    foundation::Data validity;
-    foundation::Data subject;
-    foundation::Data key;
-    foundation::Data issuerUniqueIdentifier;   // [1]
-    foundation::Data subjectUniqueIdentifier;  // [2]
-    foundation::Data extensions;               // [3] and its contents
-    foundation::Data outerAlgorithm;
-    std::optional<foundation::Data> signature = std::nullopt;  // a BIT STRING; a new signature if absent
+    base::Data version;  // [0] and its contents
+    base::Data serialNumber;
+    base::Data innerAlgorithm;
+    base::Data issuer;
+    base::Data validity;
+    base::Data subject;
+    base::Data key;
+    base::Data issuerUniqueIdentifier;   // [1]
+    base::Data subjectUniqueIdentifier;  // [2]
+    base::Data extensions;               // [3] and its contents
+    base::Data outerAlgorithm;
+    std::optional<base::Data> signature = std::nullopt;  // a BIT STRING; a new signature if absent
 };
 
 /// Takes an issued certificate apart; its signature is left out.
-CertificateElements takeApart(foundation::ByteView certificate);
+CertificateElements takeApart(base::ByteView certificate);
 
 /// The contents of a certificate, except its issuer. Extensions are in the order of the members.
 struct CertificateFields {
@@ -134,8 +134,8 @@ struct CertificateFields {
     std::optional<DistinguishedName> issuer =
         std::nullopt;  // the default is the issuing certificate's subject
     SigningKey key = SigningKey::cached(KeyKind::p256, "default");
-    foundation::Date notBefore = {1577836800};  // 2020-01-01 00:00:00 UTC
-    foundation::Date notAfter = {2524607999};   // 2049-12-31 23:59:59 UTC
+    values::Date notBefore = {1577836800};  // 2020-01-01 00:00:00 UTC
+    values::Date notAfter = {2524607999};   // 2049-12-31 23:59:59 UTC
 
     std::optional<BasicConstraints> basicConstraints = BasicConstraints{};
     std::string keyUsage = {};          // as in openssl.cnf: "critical,keyCertSign,cRLSign"; empty: none
@@ -157,10 +157,10 @@ struct CertificateFields {
 
 /// A certificate with its key, to issue others.
 struct IssuedCertificate {
-    foundation::Data der;
+    base::Data der;
     SigningKey key;
     DistinguishedName subject;
-    std::optional<foundation::Data> subjectKeyIdentifier = std::nullopt;
+    std::optional<base::Data> subjectKeyIdentifier = std::nullopt;
 
     std::string pem() const;
 };
@@ -170,10 +170,10 @@ IssuedCertificate issueCertificate(const CertificateFields& fields, const Issued
 
 /// The certificate with the signature that anyone can derive: if (r, s) verifies, so does (r, n - s), where n
 /// is the order of the curve. The issuer's elliptic-curve key gives the curve.
-foundation::Data underOtherSignature(foundation::ByteView certificate, const SigningKey& issuer);
+base::Data underOtherSignature(base::ByteView certificate, const SigningKey& issuer);
 
 /// A PEM block of that label around the bytes.
-std::string toPem(std::string_view label, foundation::ByteView der);
+std::string toPem(std::string_view label, base::ByteView der);
 
 struct IssuedChain {
     IssuedCertificate root;
@@ -181,7 +181,7 @@ struct IssuedChain {
     IssuedCertificate leaf;
 
     /// Leaf first, the root last or left out.
-    std::vector<foundation::Data> list(bool withRoot = true) const;
+    std::vector<base::Data> list(bool withRoot = true) const;
 
     /// The same in PEM, as a server is configured with it: leaf and intermediate.
     std::string serverPem() const { return leaf.pem() + intermediate.pem(); }

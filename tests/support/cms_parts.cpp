@@ -2,7 +2,7 @@
 
 #include <stdexcept>
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 #include "support/code_directory_builder.h"
 #include "support/ticket_builder.h"
 
@@ -43,7 +43,7 @@ std::uint8_t tagOf(const Data& element) {
 }
 
 Data identifierElement(std::string_view contents) {
-    return derElement(kObjectIdentifier, foundation::asBytes(contents));
+    return derElement(kObjectIdentifier, base::asBytes(contents));
 }
 
 Data number(std::uint8_t value) {
@@ -56,12 +56,12 @@ Data sequence(const std::vector<Data>& parts) {
 }
 
 Data name() {
-    const Data text = derElement(0x0C, foundation::asBytes("Signer"));
+    const Data text = derElement(0x0C, base::asBytes("Signer"));
     return sequence({derElement(kSet, sequence({identifierElement("\x55\x04\x03"), text}))});
 }
 
 Data bitString(const Data& bytes) {
-    return derElement(kBitString, foundation::ByteWriter().u8(0).bytes(bytes).data());
+    return derElement(kBitString, base::ByteWriter().u8(0).bytes(bytes).data());
 }
 
 Data modulus(std::size_t bits) {
@@ -77,7 +77,7 @@ std::vector<Data> derElements(ByteView contents) {
     std::vector<Data> elements;
     while (!contents.empty()) {
         const Header header = headerOf(contents);
-        elements.push_back(foundation::toData(contents.first(header.size + header.length)));
+        elements.push_back(base::toData(contents.first(header.size + header.length)));
         contents = contents.subspan(elements.back().size());
     }
     return elements;
@@ -89,7 +89,7 @@ ByteView derContents(ByteView element) {
 
 Data joined(const std::vector<Data>& parts) {
     Data all;
-    for (const Data& part : parts) foundation::append(all, part);
+    for (const Data& part : parts) base::append(all, part);
     return all;
 }
 
@@ -150,7 +150,7 @@ Data CmsParts::build() const {
 }
 
 Data certificateAround(const Data& publicKey, std::optional<std::string_view> keyIdentifier) {
-    const Data day = derElement(0x17, foundation::asBytes("260101000000Z"));
+    const Data day = derElement(0x17, base::asBytes("260101000000Z"));
     const Data algorithm = algorithmIdentifier(kRsaIdentifier);
     std::vector<Data> fields = {derElement(kContext0, number(2)),
                                 number(1),
@@ -160,7 +160,7 @@ Data certificateAround(const Data& publicKey, std::optional<std::string_view> ke
                                 name(),
                                 publicKey};
     if (keyIdentifier) {
-        const Data value = derElement(kOctetString, foundation::asBytes(*keyIdentifier));
+        const Data value = derElement(kOctetString, base::asBytes(*keyIdentifier));
         const Data extension = sequence({identifierElement(kKeyIdentifier), derElement(kOctetString, value)});
         fields.push_back(derElement(kContext3, sequence({extension})));
     }
@@ -179,7 +179,7 @@ CmsParts signedByExponentOne(std::size_t bits, ByteView content) {
     Data padded(size - 3 - digest.size(), std::byte{0xFF});
     padded.insert(padded.begin(), {std::byte{0}, std::byte{1}});
     padded.push_back(std::byte{0});
-    foundation::append(padded, digest);
+    base::append(padded, digest);
 
     CmsSignerParts signer;
     signer.version = number(1);
@@ -197,7 +197,7 @@ CmsParts signedByExponentOne(std::size_t bits, ByteView content) {
 }
 
 Data withIndefiniteLengths(ByteView der, int levels) {
-    foundation::ByteWriter writer;
+    base::ByteWriter writer;
     for (const Data& element : derElements(der)) {
         if ((tagOf(element) & 0x20U) == 0 || levels == 0) {
             writer.bytes(element);

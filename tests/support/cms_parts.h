@@ -7,12 +7,12 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::test {
 
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteView;
+using base::Data;
 
 /// The consecutive elements in `contents`, in DER made by the tests.
 std::vector<Data> derElements(ByteView contents);

@@ -8,7 +8,7 @@
 #include <openssl/x509.h>
 #include <openssl/x509v3.h>
 
-#include "foundation/handle.h"
+#include "base/handle.h"
 #include "support/cms_parts.h"
 #include "support/code_directory_builder.h"
 #include "support/openssl_handles.h"
@@ -18,12 +18,12 @@ namespace pinwell::test {
 
 namespace {
 
-using Message = foundation::Handle<CMS_ContentInfo, CMS_ContentInfo_free>;
-using TstInfo = foundation::Handle<TS_TST_INFO, TS_TST_INFO_free>;
-using Imprint = foundation::Handle<TS_MSG_IMPRINT, TS_MSG_IMPRINT_free>;
-using Algorithm = foundation::Handle<X509_ALGOR, X509_ALGOR_free>;
-using Integer = foundation::Handle<ASN1_INTEGER, ASN1_INTEGER_free>;
-using Time = foundation::Handle<ASN1_GENERALIZEDTIME, ASN1_GENERALIZEDTIME_free>;
+using Message = base::Handle<CMS_ContentInfo, CMS_ContentInfo_free>;
+using TstInfo = base::Handle<TS_TST_INFO, TS_TST_INFO_free>;
+using Imprint = base::Handle<TS_MSG_IMPRINT, TS_MSG_IMPRINT_free>;
+using Algorithm = base::Handle<X509_ALGOR, X509_ALGOR_free>;
+using Integer = base::Handle<ASN1_INTEGER, ASN1_INTEGER_free>;
+using Time = base::Handle<ASN1_GENERALIZEDTIME, ASN1_GENERALIZEDTIME_free>;
 
 struct Identity {
     KeyHandle key;
@@ -76,7 +76,7 @@ Data encoded(const T* object, int (*encode)(const T*, unsigned char**)) {
     const int length = encode(object, &bytes);
     require(length > 0, "encoding");
     const auto view = std::as_bytes(std::span<const unsigned char>(bytes, static_cast<std::size_t>(length)));
-    Data data = foundation::toData(view);
+    Data data = base::toData(view);
     OPENSSL_free(bytes);
     return data;
 }
@@ -109,7 +109,7 @@ Message signMessage(const Identity& identity, int contentType, ByteView content,
 
 void breakSignature(const Message& message) {
     ASN1_OCTET_STRING* value = CMS_SignerInfo_get0_signature(signerOf(message));
-    Data bytes = foundation::toData(viewOf(value));
+    Data bytes = base::toData(viewOf(value));
     bytes.back() ^= std::byte{1};
     ASN1_OCTET_STRING_set(value, static_cast<const unsigned char*>(static_cast<const void*>(bytes.data())),
                           static_cast<int>(bytes.size()));

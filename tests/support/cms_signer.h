@@ -8,12 +8,12 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::test {
 
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteView;
+using base::Data;
 
 enum class TestKey { ecP256, rsa2048 };
 

@@ -7,11 +7,11 @@
 #include <stdexcept>
 #include <utility>
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 
 namespace pinwell::test {
 
-using foundation::ByteWriter;
+using base::ByteWriter;
 
 namespace {
 
@@ -43,7 +43,7 @@ Data codeDigest(std::uint8_t type, ByteView bytes) {
     if (EVP_Digest(bytes.data(), bytes.size(), value.data(), nullptr, digest, nullptr) != 1) {
         throw std::runtime_error("cannot digest");
     }
-    return foundation::toData(std::as_bytes(std::span(value)).first(sizeOfDigest(type)));
+    return base::toData(std::as_bytes(std::span(value)).first(sizeOfDigest(type)));
 }
 
 Data codeHashOf(std::uint8_t type, ByteView codeDirectory) {
@@ -61,7 +61,7 @@ Data emptyRequirements() {
 }
 
 CodeDirectoryBuilder& CodeDirectoryBuilder::covers(std::uint32_t slot, ByteView component) {
-    components_[slot] = foundation::toData(component);
+    components_[slot] = base::toData(component);
     return *this;
 }
 

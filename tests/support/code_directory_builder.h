@@ -9,7 +9,7 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::test {
 
@@ -18,8 +18,8 @@ inline std::uint32_t u32(std::size_t value) {
     return static_cast<std::uint32_t>(value);
 }
 
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteView;
+using base::Data;
 
 /// The digest of a code directory's type number (1 SHA-1, 2 SHA-256, 3 SHA-256 cut to 20 bytes, 4 SHA-384).
 Data codeDigest(std::uint8_t type, ByteView bytes);

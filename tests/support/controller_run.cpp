@@ -3,7 +3,7 @@
 #include <filesystem>
 #include <stdexcept>
 
-#include "foundation/base64.h"
+#include "base/text.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/run.h"
 
@@ -21,15 +21,15 @@ std::shared_ptr<PWHashedFile> makeSignedBundle(TestPlatform& platform) {
 
 }  // namespace
 
-int statusOfRun(std::uint8_t operation, const foundation::URL& path, TestPlatform& platform,
+int statusOfRun(std::uint8_t operation, const values::URL& path, TestPlatform& platform,
                 const Platform& services, std::string_view answer, const std::function<void()>& meanwhile) {
     const auto answerLookup = [&] {
         if (meanwhile) meanwhile();
-        const https::HTTPResponse response{*foundation::URL::fromString("https://api.lumora.example/"),
+        const https::HTTPResponse response{*values::URL::fromString("https://api.lumora.example/"),
                                            200,
                                            {{"X-Ostrel-Request-UUID", "REQUEST"}}};
         const auto completion = platform.https.sessions.back()->completions.at(0);
-        completion(foundation::toData(answer), response, std::nullopt);
+        completion(base::toData(answer), response, std::nullopt);
     };
     int status = kExitNothingRecorded;
     const auto ended =
@@ -44,20 +44,19 @@ const https::Request& ControllerRun::request() const {
 }
 
 std::optional<int> ControllerRun::answer(std::string_view body, https::Headers headers, int status) {
-    https::HTTPResponse response{*foundation::URL::fromString("https://api.lumora.example/"), status,
+    https::HTTPResponse response{*values::URL::fromString("https://api.lumora.example/"), status,
                                  std::move(headers)};
     const auto completion = platform.https.sessions.at(0)->completions.at(0);
-    return platform.exitStatusOf([&] { completion(foundation::toData(body), response, std::nullopt); });
+    return platform.exitStatusOf([&] { completion(base::toData(body), response, std::nullopt); });
 }
 
-std::optional<int> ControllerRun::fail(const foundation::Error& error) {
+std::optional<int> ControllerRun::fail(const base::Error& error) {
     const auto completion = platform.https.sessions.at(0)->completions.at(0);
     return platform.exitStatusOf([&] { completion(std::nullopt, std::nullopt, error); });
 }
 
-std::string ControllerRun::inlineAnswer(const foundation::Data& ticket) {
-    return R"({"records":[{"fields":{"signedTicket":{"value":")" + foundation::encodeBase64(ticket) +
-           R"("}}}]})";
+std::string ControllerRun::inlineAnswer(const base::Data& ticket) {
+    return R"({"records":[{"fields":{"signedTicket":{"value":")" + base::encodeBase64(ticket) + R"("}}}]})";
 }
 
 }  // namespace pinwell::test

@@ -6,17 +6,17 @@
 #include <optional>
 #include <string>
 
-#include "foundation/bytes.h"
-#include "foundation/url.h"
+#include "base/bytes.h"
 #include "src/DownloadDelegate.h"
 #include "support/test_platform.h"
+#include "values/url.h"
 
 namespace pinwell::test {
 
 /// The exit code of a run of the tool with this response body to its lookup, if it sends one. The services
 /// are the platform's, except the services that the test has replaced. `meanwhile` runs between request and
 /// response.
-int statusOfRun(std::uint8_t operation, const foundation::URL& path, TestPlatform& platform,
+int statusOfRun(std::uint8_t operation, const values::URL& path, TestPlatform& platform,
                 const Platform& services, std::string_view answer,
                 const std::function<void()>& meanwhile = {});
 
@@ -25,12 +25,12 @@ class ControllerRun {
   public:
     ControllerRun();
 
-    static foundation::Data fileHash() { return foundation::Data(20, std::byte{0xAB}); }
+    static base::Data fileHash() { return base::Data(20, std::byte{0xAB}); }
     static constexpr const char* kPrettyHash = "2/abababababababababababababababababababab";
 
     std::string artefact() const { return platform.directory / "App.app"; }
     std::string stapledPath() const { return platform.directory / "App.app/Contents/CodeResources"; }
-    void staple(const foundation::Data& ticket) { writeFile(stapledPath(), foundation::ByteView(ticket)); }
+    void staple(const base::Data& ticket) { writeFile(stapledPath(), base::ByteView(ticket)); }
 
     /// The request of the lookup's one task; fails the test when there is none.
     const https::Request& request() const;
@@ -39,10 +39,10 @@ class ControllerRun {
     std::optional<int> answer(std::string_view body,
                               https::Headers headers = {{"X-Ostrel-Request-UUID", "REQUEST"}},
                               int status = 200);
-    std::optional<int> fail(const foundation::Error& error);
+    std::optional<int> fail(const base::Error& error);
 
     /// A lookup response with the ticket inline.
-    static std::string inlineAnswer(const foundation::Data& ticket);
+    static std::string inlineAnswer(const base::Data& ticket);
 
     TestPlatform platform;
     std::shared_ptr<PWHashedFile> file;

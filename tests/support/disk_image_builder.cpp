@@ -1,10 +1,10 @@
 #include "support/disk_image_builder.h"
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 
 namespace pinwell::test {
 
-using foundation::ByteWriter;
+using base::ByteWriter;
 
 namespace {
 
@@ -19,7 +19,7 @@ void fillUpTo(std::size_t end, ByteWriter& writer) {
 }  // namespace
 
 Data ticketBlob(std::string_view ticket) {
-    return makeBlob(0xFADE0B01, foundation::asBytes(ticket));
+    return makeBlob(0xFADE0B01, base::asBytes(ticket));
 }
 
 Data DiskImageBuilder::trailer() const {

@@ -2,12 +2,12 @@
 
 #include <sys/stat.h>
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 #include "support/temporary_directory.h"
 
 namespace pinwell::test {
 
-using foundation::ByteWriter;
+using base::ByteWriter;
 
 namespace {
 

@@ -6,10 +6,10 @@
 #include <utility>
 #include <vector>
 
+#include "base/bytes.h"
 #include "codesign/code_signing.h"
-#include "foundation/bytes.h"
-#include "foundation/url.h"
 #include "support/status.h"
+#include "values/url.h"
 
 namespace pinwell::test {
 
@@ -32,44 +32,42 @@ class FakeCodeSigningService : public codesign::CodeSigningService {
     mutable std::uint32_t informationSets = 0;
     mutable int createCalls = 0;
 
-    foundation::Result<std::shared_ptr<codesign::StaticCode>> staticCode(const foundation::URL&,
-                                                                         std::uint32_t) const override {
+    base::Result<std::shared_ptr<codesign::StaticCode>> staticCode(const values::URL&,
+                                                                   std::uint32_t) const override {
         ++createCalls;
         return withStatus<std::shared_ptr<codesign::StaticCode>>(
             createStatus, handsOutCode ? std::make_shared<Code>() : nullptr);
     }
-    foundation::Result<void> checkValidity(const codesign::StaticCode&, std::uint32_t flags) const override {
+    base::Result<void> checkValidity(const codesign::StaticCode&, std::uint32_t flags) const override {
         validityFlags = flags;
         return withStatus(validity);
     }
-    foundation::Result<std::optional<codesign::SigningInformation>> signingInformation(
+    base::Result<std::optional<codesign::SigningInformation>> signingInformation(
         const codesign::StaticCode& code, std::uint32_t sets) const override {
         informationSets = sets;
         const bool isDetached = dynamic_cast<const Code&>(code).isDetached;
         return withStatus(informationStatus, isDetached ? detachedInformation : information);
     }
-    foundation::Result<std::shared_ptr<codesign::Signer>> makeSigner(
-        const codesign::SignerParameters& parameters, std::uint32_t flags) const override {
+    base::Result<std::shared_ptr<codesign::Signer>> makeSigner(const codesign::SignerParameters& parameters,
+                                                               std::uint32_t flags) const override {
         signerParameters = parameters;
         signerFlags = flags;
         return withStatus<std::shared_ptr<codesign::Signer>>(signerStatus, std::make_shared<Signer>());
     }
 
     /// The "signature" is one byte, which setDetachedSignature expects.
-    foundation::Result<void> addSignature(codesign::Signer&, const codesign::StaticCode&,
-                                          std::uint32_t) const override {
+    base::Result<void> addSignature(codesign::Signer&, const codesign::StaticCode&,
+                                    std::uint32_t) const override {
         if (addStatus == codesign::kSuccess) *signerParameters->detachedSignature = kSignature;
         return withStatus(addStatus);
     }
-    foundation::Result<void> setDetachedSignature(codesign::StaticCode& code,
-                                                  const foundation::Data& detached,
-                                                  std::uint32_t) const override {
+    base::Result<void> setDetachedSignature(codesign::StaticCode& code, const base::Data& detached,
+                                            std::uint32_t) const override {
         if (detached != kSignature) return withStatus(codesign::kInvalidSignature);
         if (detachedStatus == codesign::kSuccess) dynamic_cast<Code&>(code).isDetached = true;
         return withStatus(detachedStatus);
     }
-    foundation::Result<std::vector<codesign::SigningInformation>> allCodeHashes(
-        const foundation::URL&) const override {
+    base::Result<std::vector<codesign::SigningInformation>> allCodeHashes(const values::URL&) const override {
         std::vector<codesign::SigningInformation> all;
         if (information) all.push_back(*information);
         return withStatus(informationStatus, std::move(all));
@@ -80,7 +78,7 @@ class FakeCodeSigningService : public codesign::CodeSigningService {
         bool isDetached = false;
     };
     struct Signer : codesign::Signer {};
-    inline static const foundation::Data kSignature{std::byte{0x51}};
+    inline static const base::Data kSignature{std::byte{0x51}};
 };
 
 }  // namespace pinwell::test

@@ -11,19 +11,19 @@
 #include <ostream>
 #include <utility>
 
-#include "foundation/bytes.h"
-#include "foundation/url.h"
+#include "base/bytes.h"
 #include "support/temporary_directory.h"
+#include "values/url.h"
 
 namespace pinwell::test {
 
+using base::Error;
 using files::ByteView;
 using files::Data;
 using files::FileHandle;
 using files::FileHandleError;
 using files::Result;
 using files::URL;
-using foundation::Error;
 
 namespace {
 
@@ -230,7 +230,7 @@ Result<std::unique_ptr<files::ItemLock>> RecordingFileManager::lockItem(
     return real_->lockItem(item, waiting);
 }
 
-Result<foundation::Anchor> RecordingFileManager::holdItem(const URL& item) {
+Result<base::Anchor> RecordingFileManager::holdItem(const URL& item) {
     return real_->holdItem(item);
 }
 

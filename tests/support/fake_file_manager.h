@@ -72,7 +72,7 @@ class RecordingFileManager final : public files::FileManager {
     files::Result<std::unique_ptr<files::ItemLock>> lockItem(const files::URL& item,
                                                              const std::function<void()>& waiting) override;
     /// Not recorded: it reads and changes nothing.
-    files::Result<foundation::Anchor> holdItem(const files::URL& item) override;
+    files::Result<base::Anchor> holdItem(const files::URL& item) override;
     std::optional<files::URL> mainExecutableOfBundle(const files::URL& directory) const override;
     files::Result<bool> volumeSupportsCloning(const files::URL& item) const override;
     files::Result<files::URL> createReplacementDirectory(const files::URL& item) override;

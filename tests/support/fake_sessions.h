@@ -43,13 +43,13 @@ class FakeSession : public https::Session {
 
 class FakeSessionService : public https::SessionService {
   public:
-    foundation::Result<std::shared_ptr<https::Session>> ephemeralSession(https::SessionDelegate&) override {
+    base::Result<std::shared_ptr<https::Session>> ephemeralSession(https::SessionDelegate&) override {
         if (failure) return *failure;
         sessions.push_back(std::make_shared<FakeSession>());
         return std::shared_ptr<https::Session>(sessions.back());
     }
 
-    std::optional<foundation::Error> failure;  // of the sessions made after this is set
+    std::optional<base::Error> failure;  // of the sessions made after this is set
     std::vector<std::shared_ptr<FakeSession>> sessions;
 };
 

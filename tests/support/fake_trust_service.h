@@ -17,7 +17,7 @@
 #include <utility>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "support/status.h"
 #include "trust/trust.h"
 
@@ -26,14 +26,14 @@ namespace pinwell::test {
 /// A certificate of any bytes.
 class FakeCertificate : public trust::Certificate {
   public:
-    explicit FakeCertificate(foundation::ByteView der, std::string summary = "certificate")
-        : der_(foundation::toData(der)), summary_(std::move(summary)) {}
+    explicit FakeCertificate(base::ByteView der, std::string summary = "certificate")
+        : der_(base::toData(der)), summary_(std::move(summary)) {}
 
-    const foundation::Data& der() const override { return der_; }
+    const base::Data& der() const override { return der_; }
     std::string subjectSummary() const override { return summary_; }
 
   private:
-    foundation::Data der_;
+    base::Data der_;
     std::string summary_;
 };
 
@@ -49,12 +49,12 @@ class FakeTrustService : public trust::TrustService {
         std::optional<std::string> failureDescription = std::nullopt;
     };
     struct SignatureCheck {
-        foundation::Data message;
-        foundation::Data signature;
+        base::Data message;
+        base::Data signature;
     };
 
     // Results. Each call takes a list's next entry, and the last one stays; an empty list is success.
-    std::function<bool(foundation::ByteView)> parsesCertificate = [](foundation::ByteView) { return true; };
+    std::function<bool(base::ByteView)> parsesCertificate = [](base::ByteView) { return true; };
     std::optional<trust::PolicyRef> libraryPolicy;  // of namedPolicy
     trust::Status makeTrustStatus = trust::kSuccess;
     bool makesTrustObject = true;
@@ -64,15 +64,15 @@ class FakeTrustService : public trust::TrustService {
     std::optional<trust::Error> signatureError;
 
     // Records, in the order of the calls.
-    mutable std::vector<foundation::Data> parsedCertificates;
+    mutable std::vector<base::Data> parsedCertificates;
     mutable std::vector<std::string> namedPolicyRequests;
-    mutable std::vector<std::vector<foundation::Data>> certificateLists;  // of makeTrust
-    mutable std::vector<trust::PolicyRef> policies;                       // of makeTrust and setPolicy
+    mutable std::vector<std::vector<base::Data>> certificateLists;  // of makeTrust
+    mutable std::vector<trust::PolicyRef> policies;                 // of makeTrust and setPolicy
     mutable std::size_t evaluationCount = 0;
     mutable std::vector<SignatureCheck> signatureChecks;
 
-    trust::CertificateRef parseCertificate(foundation::ByteView der) const override {
-        parsedCertificates.push_back(foundation::toData(der));
+    trust::CertificateRef parseCertificate(base::ByteView der) const override {
+        parsedCertificates.push_back(base::toData(der));
         return parsesCertificate(der) ? std::make_shared<FakeCertificate>(der) : nullptr;
     }
 
@@ -81,17 +81,17 @@ class FakeTrustService : public trust::TrustService {
         return libraryPolicy;
     }
 
-    foundation::Result<std::shared_ptr<trust::Trust>> makeTrust(
-        std::vector<trust::CertificateRef> certificates, trust::PolicyRef policy) const override {
+    base::Result<std::shared_ptr<trust::Trust>> makeTrust(std::vector<trust::CertificateRef> certificates,
+                                                          trust::PolicyRef policy) const override {
         auto& list = certificateLists.emplace_back();
         for (const auto& certificate : certificates) list.push_back(certificate->der());
         policies.push_back(std::move(policy));
         return withStatus(makeTrustStatus, makesTrustObject ? trustOfChallenge() : nullptr);
     }
 
-    foundation::Result<void> verifySignature(const trust::PublicKey&, foundation::ByteView message,
-                                             foundation::ByteView signature) const override {
-        signatureChecks.push_back({foundation::toData(message), foundation::toData(signature)});
+    base::Result<void> verifySignature(const trust::PublicKey&, base::ByteView message,
+                                       base::ByteView signature) const override {
+        signatureChecks.push_back({base::toData(message), base::toData(signature)});
         if (signatureError) return *signatureError;
         return {};
     }
@@ -104,12 +104,12 @@ class FakeTrustService : public trust::TrustService {
       public:
         explicit FakeTrust(const FakeTrustService& service) : service_(service) {}
 
-        foundation::Result<void> setPolicy(trust::PolicyRef policy) override {
+        base::Result<void> setPolicy(trust::PolicyRef policy) override {
             service_.policies.push_back(std::move(policy));
             last_.reset();
             return withStatus(pick(service_.setPolicyStatuses, service_.setPolicyCount_++));
         }
-        foundation::Result<trust::Verdict> evaluate() override {
+        base::Result<trust::Verdict> evaluate() override {
             last_ = pick(service_.evaluations, service_.evaluationCount++);
             return withStatus(last_->status, last_->verdict);
         }

@@ -5,8 +5,8 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::Dictionary;
-using foundation::Value;
+using values::Dictionary;
+using values::Value;
 
 class FakeUserDefaults final : public defaults::UserDefaults {
   public:

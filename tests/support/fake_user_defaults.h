@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "defaults/user_defaults.h"
-#include "foundation/value.h"
+#include "values/value.h"
 
 namespace pinwell::test {
 
@@ -17,7 +17,7 @@ class FakeUserDefaultsService final : public defaults::UserDefaultsService {
   public:
     std::unique_ptr<defaults::UserDefaults> openDomain(std::string_view domain) override;
 
-    std::map<std::string, foundation::Dictionary, std::less<>> domains;
+    std::map<std::string, values::Dictionary, std::less<>> domains;
     std::vector<std::string> opened;  // the opened domains, in order
 };
 

@@ -12,7 +12,7 @@
 #include <string_view>
 #include <utility>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "support/fake_code_signing.h"
 #include "support/temporary_directory.h"
 
@@ -50,21 +50,19 @@ class HashByExecutable : public FakeCodeSigningService {
     /// The text of an executable that makes a query for its hash raise an exception.
     static constexpr const char* kRaises = "raises..............";
 
-    foundation::Result<std::shared_ptr<codesign::StaticCode>> staticCode(const foundation::URL& url,
-                                                                         std::uint32_t) const override {
+    base::Result<std::shared_ptr<codesign::StaticCode>> staticCode(const values::URL& url,
+                                                                   std::uint32_t) const override {
         auto code = std::make_shared<Code>();
         code->path = url.path();
         return std::shared_ptr<codesign::StaticCode>(std::move(code));
     }
-    foundation::Result<void> checkValidity(const codesign::StaticCode&, std::uint32_t) const override {
-        return {};
-    }
-    foundation::Result<std::optional<codesign::SigningInformation>> signingInformation(
+    base::Result<void> checkValidity(const codesign::StaticCode&, std::uint32_t) const override { return {}; }
+    base::Result<std::optional<codesign::SigningInformation>> signingInformation(
         const codesign::StaticCode& code, std::uint32_t) const override {
         const std::string hash = readFile(dynamic_cast<const Code&>(code).path + "/Contents/MacOS/App");
         if (hash == kRaises) throw std::runtime_error("nobody has thought of this");
         codesign::SigningInformation found;
-        found.unique = foundation::toData(hash);
+        found.unique = base::toData(hash);
         found.digestAlgorithm = 2;
         return std::optional(std::move(found));
     }

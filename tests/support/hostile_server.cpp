@@ -22,8 +22,7 @@
 #include <system_error>
 #include <thread>
 
-#include "foundation/file_io.h"
-#include "foundation/handle.h"
+#include "base/handle.h"
 #include "support/certificate_builder.h"
 #include "support/openssl_handles.h"
 #include "support/require.h"
@@ -31,7 +30,7 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::FileDescriptor;
+using base::FileDescriptor;
 
 constexpr std::size_t kMaximumHead = std::size_t{1} << 20U;
 constexpr std::size_t kMaximumRequest = std::size_t{80} << 20U;
@@ -39,8 +38,8 @@ constexpr std::size_t kMaximumEndless = std::size_t{256} << 20U;
 constexpr std::size_t kMaximumConnections = 256;
 constexpr std::chrono::seconds kPatience{60};
 
-using ContextHandle = foundation::Handle<SSL_CTX, SSL_CTX_free>;
-using ConnectionHandle = foundation::Handle<SSL, SSL_free>;
+using ContextHandle = base::Handle<SSL_CTX, SSL_CTX_free>;
+using ConnectionHandle = base::Handle<SSL, SSL_free>;
 
 bool equalsWithoutCase(std::string_view a, std::string_view b) {
     return a.size() == b.size() && strncasecmp(a.data(), b.data(), a.size()) == 0;

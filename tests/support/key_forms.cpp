@@ -2,7 +2,7 @@
 
 #include <stdexcept>
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 #include "support/certificate_builder.h"
 #include "support/ticket_builder.h"
 #include "trust/der.h"
@@ -10,9 +10,9 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::ByteView;
-using foundation::ByteWriter;
-using foundation::Data;
+using base::ByteView;
+using base::ByteWriter;
+using base::Data;
 
 constexpr std::uint8_t kInfoSequence = 0x30;
 constexpr std::uint8_t kInfoBits = 0x03;
@@ -29,7 +29,7 @@ KeyInfo readInfo(ByteView info) {
     const auto bits =
         algorithm ? trust::der::readElement(whole->contents.subspan(algorithm->whole.size())) : std::nullopt;
     if (!bits || bits->contents.empty()) throw std::runtime_error("no public key");
-    return {foundation::toData(algorithm->whole), foundation::toData(bits->contents.subspan(1))};
+    return {base::toData(algorithm->whole), base::toData(bits->contents.subspan(1))};
 }
 
 Data writtenInfo(ByteView algorithm, ByteView bits) {
@@ -68,7 +68,7 @@ Data onDescribedCurve(ByteView info) {
 }
 
 Data asPssKey(ByteView info) {
-    return underAlgorithm(info, foundation::asBytes(kPssAlgorithm));
+    return underAlgorithm(info, base::asBytes(kPssAlgorithm));
 }
 
 Data underAlgorithm(ByteView info, ByteView algorithm) {
@@ -76,7 +76,7 @@ Data underAlgorithm(ByteView info, ByteView algorithm) {
 }
 
 Data rsaKey(ByteView modulus, ByteView exponent) {
-    return writtenInfo(foundation::asBytes(kRsaAlgorithm),
+    return writtenInfo(base::asBytes(kRsaAlgorithm),
                        derElement(kInfoSequence, ByteWriter()
                                                      .bytes(derElement(kInfoNumber, modulus))
                                                      .bytes(derElement(kInfoNumber, exponent))

@@ -15,22 +15,22 @@ class MemoryReader : public files::FileReader {
   public:
     static constexpr std::uint64_t kNowhere = std::numeric_limits<std::uint64_t>::max();
 
-    explicit MemoryReader(foundation::Data bytes, std::uint64_t broken = kNowhere)
+    explicit MemoryReader(base::Data bytes, std::uint64_t broken = kNowhere)
         : bytes_(std::move(bytes)), broken_(broken) {}
 
     std::uint64_t seekToEnd() override { return position_ = bytes_.size(); }
     std::uint64_t seek(std::uint64_t position) override { return position_ = position; }
     std::uint64_t position() override { return position_; }
-    foundation::Data read(std::uint64_t length) override {
+    base::Data read(std::uint64_t length) override {
         const std::uint64_t begin = std::min<std::uint64_t>(position_, bytes_.size());
         const std::uint64_t end = begin + std::min<std::uint64_t>(length, bytes_.size() - begin);
         if (broken_ >= begin && broken_ < end) throw files::FileHandleError("a broken sector");
         position_ = end;
-        return foundation::toData(foundation::ByteView(bytes_).subspan(begin, end - begin));
+        return base::toData(base::ByteView(bytes_).subspan(begin, end - begin));
     }
 
   private:
-    foundation::Data bytes_;
+    base::Data bytes_;
     std::uint64_t broken_;
     std::uint64_t position_ = 0;
 };

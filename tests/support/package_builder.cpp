@@ -1,12 +1,12 @@
 #include "support/package_builder.h"
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 #include "support/archive_builder.h"
 
 namespace pinwell::test {
 
 Data makeTrailer(const TrailerFields& fields, const Data& data) {
-    foundation::ByteWriter writer;
+    base::ByteWriter writer;
     writer.bytes(data).text(fields.magic).le16(fields.version).le16(fields.type);
     writer.le32(fields.length.value_or(static_cast<std::uint32_t>(data.size()))).le32(fields.upperLength);
     return std::move(writer).take();
@@ -30,13 +30,13 @@ PackageBuilder& PackageBuilder::terminator() {
 PackageBuilder& PackageBuilder::ticket(std::string_view bytes) {
     TrailerFields fields;
     fields.type = 2;
-    return trailer(fields, foundation::toData(bytes));
+    return trailer(fields, base::toData(bytes));
 }
 
 PackageBuilder& PackageBuilder::unknown(std::string_view bytes, std::uint16_t type) {
     TrailerFields fields;
     fields.type = type;
-    return trailer(fields, foundation::toData(bytes));
+    return trailer(fields, base::toData(bytes));
 }
 
 PackageBuilder& PackageBuilder::trailer(const TrailerFields& fields, const Data& data) {
@@ -44,17 +44,17 @@ PackageBuilder& PackageBuilder::trailer(const TrailerFields& fields, const Data&
 }
 
 PackageBuilder& PackageBuilder::bytes(std::string_view text) {
-    return append(foundation::toData(text));
+    return append(base::toData(text));
 }
 
 PackageBuilder& PackageBuilder::append(const Data& bytes) {
-    foundation::append(trailers_, bytes);
+    base::append(trailers_, bytes);
     return *this;
 }
 
 std::string PackageBuilder::build() const {
-    std::string package(foundation::asText(archive_));
-    package += foundation::asText(trailers_);
+    std::string package(base::asText(archive_));
+    package += base::asText(trailers_);
     return package;
 }
 

@@ -6,11 +6,11 @@
 #include <optional>
 #include <string>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::test {
 
-using foundation::Data;
+using base::Data;
 
 inline constexpr std::uint16_t kUnknownTrailerType = 7;
 

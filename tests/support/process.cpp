@@ -15,13 +15,13 @@
 #include <functional>
 #include <system_error>
 
-#include "foundation/file_io.h"
+#include "base/handle.h"
 
 namespace pinwell::test {
 namespace {
 
 using Clock = std::chrono::steady_clock;
-using foundation::FileDescriptor;
+using base::FileDescriptor;
 
 void check(int error, const char* what) {
     if (error != 0) throw std::system_error(error, std::generic_category(), what);

@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 #include "support/cms_signer.h"
 #include "support/code_directory_builder.h"
 #include "support/executable_image_builder.h"
@@ -14,7 +14,7 @@ constexpr std::size_t kPageSize = 4096;
 constexpr std::uint32_t kAdHoc = 2;
 
 void putNumber(Data& bytes, std::size_t at, std::uint32_t value) {
-    const Data number = foundation::ByteWriter().be32(value).data();
+    const Data number = base::ByteWriter().be32(value).data();
     std::copy(number.begin(), number.end(), bytes.begin() + static_cast<std::ptrdiff_t>(at));
 }
 

@@ -7,12 +7,12 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 
 namespace pinwell::test {
 
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteView;
+using base::Data;
 
 struct SignedImageParts {
     std::vector<std::uint8_t> digestTypes{2};  // of the code directories, slot 0's first

@@ -2,13 +2,13 @@
 
 #include <zlib.h>
 
-#include "foundation/base64.h"
+#include "base/text.h"
 #include "support/archive_builder.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::ByteWriter;
+using base::ByteWriter;
 
 constexpr std::uint64_t kSectorSize = 512;
 constexpr std::uint32_t kCrc32 = 2;
@@ -24,10 +24,10 @@ std::uint32_t crcOf(ByteView bytes) {
 }
 
 Data imageOfTable(ByteView table, ByteView data, const TrailerChecksums& checksums) {
-    const Data list = foundation::toData(
+    const Data list = base::toData(
         "<plist version=\"1.0\"><dict><key>resource-fork</key><dict><key>blkx</key><array><dict><key>Name"
         "</key><string>whole</string><key>Data</key><data>" +
-        foundation::encodeBase64(table) + "</data></dict></array></dict></dict></plist>");
+        base::encodeBase64(table) + "</data></dict></array></dict></dict></plist>");
     ByteWriter trailer;
     trailer.text("koly").be32(4).zeros(16).be64(0).be64(data.size()).zeros(40);
     appendChecksum(trailer, kCrc32, checksums.data);

@@ -5,13 +5,13 @@
 #include <cstdint>
 #include <optional>
 
-#include "foundation/byte_writer.h"
-#include "foundation/bytes.h"
+#include "base/byte_io.h"
+#include "base/bytes.h"
 
 namespace pinwell::test {
 
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteView;
+using base::Data;
 
 /// CRC-32 (ISO 3309).
 std::uint32_t crcOf(ByteView bytes);
@@ -51,9 +51,9 @@ class TabledImageBuilder {
   private:
     std::uint32_t ownChecksum() const;
 
-    foundation::ByteWriter data_;
-    foundation::ByteWriter contents_;
-    foundation::ByteWriter blocks_;
+    base::ByteWriter data_;
+    base::ByteWriter contents_;
+    base::ByteWriter blocks_;
     std::uint64_t sectors_ = 0;
     std::uint64_t skew_ = 0;
     std::uint32_t count_ = 0;

@@ -28,8 +28,8 @@ void writeFile(const std::string& path, std::string_view contents) {
     if (!file) throw std::runtime_error("cannot write " + path);
 }
 
-void writeFile(const std::string& path, foundation::ByteView contents) {
-    writeFile(path, foundation::asText(contents));
+void writeFile(const std::string& path, base::ByteView contents) {
+    writeFile(path, base::asText(contents));
 }
 
 std::string readFile(const std::string& path) {

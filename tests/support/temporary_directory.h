@@ -4,8 +4,8 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/bytes.h"
-#include "foundation/url.h"
+#include "base/bytes.h"
+#include "values/url.h"
 
 namespace pinwell::test {
 
@@ -18,9 +18,7 @@ class TemporaryDirectory {
 
     const std::string& path() const noexcept { return path_; }
     std::string operator/(std::string_view name) const { return path_ + "/" + std::string(name); }
-    foundation::URL url(std::string_view name) const {
-        return foundation::URL::fileURLWithPath(*this / name);
-    }
+    values::URL url(std::string_view name) const { return values::URL::fileURLWithPath(*this / name); }
 
   private:
     std::string path_;
@@ -28,7 +26,7 @@ class TemporaryDirectory {
 
 /// Writes a whole file, making the directories above it; throws when it cannot.
 void writeFile(const std::string& path, std::string_view contents);
-void writeFile(const std::string& path, foundation::ByteView contents);
+void writeFile(const std::string& path, base::ByteView contents);
 
 /// The whole file; throws when it cannot be read.
 std::string readFile(const std::string& path);

@@ -1,12 +1,12 @@
 #include "support/test_platform.h"
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 #include "src/PWHashedFile/file_kind.h"
 
 namespace pinwell::test {
 
-using foundation::ByteWriter;
-using foundation::Data;
+using base::ByteWriter;
+using base::Data;
 
 TestPlatform::TestPlatform()
     : types(types::makeTypeService()),

@@ -7,8 +7,8 @@
 
 #include <optional>
 
-#include "foundation/bytes.h"
-#include "foundation/platform_directory.h"
+#include "base/bytes.h"
+#include "config/platform_directory.h"
 #include "src/platform.h"
 #include "support/fake_code_signing.h"
 #include "support/fake_file_manager.h"
@@ -54,12 +54,12 @@ class TestPlatform {
     FakeSessionService https;
     FakeUserDefaultsService userDefaults;
     FakeSystemLog systemLog;
-    foundation::PlatformDirectory platformDirectory;
+    config::PlatformDirectory platformDirectory;
 };
 
 /// A well-framed ticket container whose payload lists `hashes` with algorithm 2, each of the payload's one
 /// hash length. Its certificates and signature are filler: only a trust service that accepts anything accepts
 /// it.
-foundation::Data unsignedTicket(const std::vector<foundation::Data>& hashes, std::uint32_t flags = 0);
+base::Data unsignedTicket(const std::vector<base::Data>& hashes, std::uint32_t flags = 0);
 
 }  // namespace pinwell::test

@@ -3,14 +3,14 @@
 #include <stdexcept>
 #include <utility>
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::ByteView;
-using foundation::ByteWriter;
-using foundation::Data;
+using base::ByteView;
+using base::ByteWriter;
+using base::Data;
 
 constexpr std::size_t kSignatureFieldSize = 72;
 
@@ -81,12 +81,12 @@ TicketPayloadBuilder& TicketPayloadBuilder::signatureTime(std::uint64_t value) {
 }
 
 TicketPayloadBuilder& TicketPayloadBuilder::entry(std::uint8_t algorithm, ByteView hash) {
-    entries_.push_back({algorithm, foundation::toData(hash)});
+    entries_.push_back({algorithm, base::toData(hash)});
     return *this;
 }
 
 TicketPayloadBuilder& TicketPayloadBuilder::trailing(ByteView bytes) {
-    foundation::append(trailing_, bytes);
+    base::append(trailing_, bytes);
     return *this;
 }
 
@@ -135,7 +135,7 @@ SatchelBuilder& SatchelBuilder::payloadLength(std::uint32_t value) {
 }
 
 SatchelBuilder& SatchelBuilder::certificate(ByteView der) {
-    certificates_.push_back(foundation::toData(der));
+    certificates_.push_back(base::toData(der));
     return *this;
 }
 
@@ -154,22 +154,22 @@ SatchelBuilder& SatchelBuilder::outerLength(std::size_t value) {
 }
 
 SatchelBuilder& SatchelBuilder::outerLengthBytes(ByteView bytes) {
-    outerLength_ = foundation::toData(bytes);
+    outerLength_ = base::toData(bytes);
     return *this;
 }
 
 SatchelBuilder& SatchelBuilder::afterSequence(ByteView bytes) {
-    afterSequence_ = foundation::toData(bytes);
+    afterSequence_ = base::toData(bytes);
     return *this;
 }
 
 SatchelBuilder& SatchelBuilder::certificateBlock(ByteView bytes) {
-    block_ = foundation::toData(bytes);
+    block_ = base::toData(bytes);
     return *this;
 }
 
 SatchelBuilder& SatchelBuilder::payload(ByteView bytes) {
-    payload_ = foundation::toData(bytes);
+    payload_ = base::toData(bytes);
     return *this;
 }
 
@@ -184,7 +184,7 @@ SatchelBuilder& SatchelBuilder::signatureSize(std::size_t value) {
 }
 
 SatchelBuilder& SatchelBuilder::signature(ByteView bytes) {
-    signature_ = foundation::toData(bytes);
+    signature_ = base::toData(bytes);
     return *this;
 }
 

@@ -16,19 +16,19 @@
 #include <string_view>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "support/certificate_builder.h"
 
 namespace pinwell::test {
 
 /// A hash of that many bytes, different for every seed: seed, seed + 1, seed + 2, ...
-foundation::Data hashOf(std::uint8_t seed, std::size_t length = 20);
+base::Data hashOf(std::uint8_t seed, std::size_t length = 20);
 
 /// Tag byte, DER length, contents.
-foundation::Data derElement(std::uint8_t tag, foundation::ByteView contents);
+base::Data derElement(std::uint8_t tag, base::ByteView contents);
 
 /// An OCTET STRING of zeros of `size` bytes, tag and length included.
-foundation::Data derElementOfSize(std::size_t size);
+base::Data derElementOfSize(std::size_t size);
 
 /// The payload of a ticket.
 class TicketPayloadBuilder {
@@ -42,17 +42,17 @@ class TicketPayloadBuilder {
     TicketPayloadBuilder& signatureTime(std::uint64_t value);
 
     /// Algorithm byte (written in version 2 only) and hash.
-    TicketPayloadBuilder& entry(std::uint8_t algorithm, foundation::ByteView hash);
+    TicketPayloadBuilder& entry(std::uint8_t algorithm, base::ByteView hash);
 
     /// Bytes after the entries, which the count does not include.
-    TicketPayloadBuilder& trailing(foundation::ByteView bytes);
+    TicketPayloadBuilder& trailing(base::ByteView bytes);
 
-    foundation::Data build() const;
+    base::Data build() const;
 
   private:
     struct Entry {
         std::uint8_t algorithm;
-        foundation::Data hash;
+        base::Data hash;
     };
 
     std::string magic_ = "m8tk";
@@ -62,14 +62,14 @@ class TicketPayloadBuilder {
     std::uint32_t flags_ = 0;
     std::uint64_t signatureTime_ = 1'795'000'000;
     std::vector<Entry> entries_;
-    foundation::Data trailing_;
+    base::Data trailing_;
 };
 
 /// The container around a payload.
 class SatchelBuilder {
   public:
     /// Leaf, intermediate and root of the chain around the payload, signed with the leaf's key.
-    static SatchelBuilder of(const IssuedChain& chain, foundation::ByteView payload);
+    static SatchelBuilder of(const IssuedChain& chain, base::ByteView payload);
 
     SatchelBuilder& magic(std::string_view value);
     SatchelBuilder& version(std::uint16_t value);
@@ -78,21 +78,21 @@ class SatchelBuilder {
     SatchelBuilder& payloadLength(std::uint32_t value);
 
     /// Adds an element to the SEQUENCE: a certificate, or any bytes in its place.
-    SatchelBuilder& certificate(foundation::ByteView der);
-    SatchelBuilder& certificates(std::vector<foundation::Data> list);
+    SatchelBuilder& certificate(base::ByteView der);
+    SatchelBuilder& certificates(std::vector<base::Data> list);
 
     /// The SEQUENCE's own tag and length; the length in its shortest form, or any bytes instead.
     SatchelBuilder& outerTag(std::uint8_t value);
     SatchelBuilder& outerLength(std::size_t value);
-    SatchelBuilder& outerLengthBytes(foundation::ByteView bytes);
+    SatchelBuilder& outerLengthBytes(base::ByteView bytes);
 
     /// Bytes after the SEQUENCE, still in the block.
-    SatchelBuilder& afterSequence(foundation::ByteView bytes);
+    SatchelBuilder& afterSequence(base::ByteView bytes);
 
     /// The whole block, in place of a SEQUENCE.
-    SatchelBuilder& certificateBlock(foundation::ByteView bytes);
+    SatchelBuilder& certificateBlock(base::ByteView bytes);
 
-    SatchelBuilder& payload(foundation::ByteView bytes);
+    SatchelBuilder& payload(base::ByteView bytes);
 
     /// Signs with that key (an elliptic-curve one of 256 bits or fewer; others do not fit). Without a key the
     /// signature field is zero.
@@ -102,31 +102,31 @@ class SatchelBuilder {
     SatchelBuilder& signatureSize(std::size_t value);
 
     /// These bytes in place of a signature, padded with zeros.
-    SatchelBuilder& signature(foundation::ByteView bytes);
+    SatchelBuilder& signature(base::ByteView bytes);
 
     /// The last byte of the signature field; it is padding only if the signature has fewer than 72 bytes.
     SatchelBuilder& lastSignatureByte(std::uint8_t value);
 
-    foundation::Data build() const;
+    base::Data build() const;
 
   private:
-    foundation::Data block() const;
-    foundation::Data signatureField(foundation::ByteView message) const;
+    base::Data block() const;
+    base::Data signatureField(base::ByteView message) const;
 
     std::string magic_ = "s8ch";
     std::uint16_t version_ = 1;
     std::uint16_t reserved_ = 0;
     std::optional<std::uint32_t> certificateBlockLength_;
     std::optional<std::uint32_t> payloadLength_;
-    std::vector<foundation::Data> certificates_;
+    std::vector<base::Data> certificates_;
     std::uint8_t outerTag_ = 0x30;
-    std::optional<foundation::Data> outerLength_;
-    foundation::Data afterSequence_;
-    std::optional<foundation::Data> block_;
-    foundation::Data payload_;
+    std::optional<base::Data> outerLength_;
+    base::Data afterSequence_;
+    std::optional<base::Data> block_;
+    base::Data payload_;
     std::optional<SigningKey> key_;
     std::optional<std::size_t> signatureSize_;
-    std::optional<foundation::Data> signature_;
+    std::optional<base::Data> signature_;
     std::optional<std::uint8_t> lastSignatureByte_;
 };
 

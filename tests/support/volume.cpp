@@ -14,7 +14,7 @@
 #include <system_error>
 #include <utility>
 
-#include "foundation/file_io.h"
+#include "base/handle.h"
 
 namespace pinwell::test {
 namespace {
@@ -35,7 +35,7 @@ struct BackingFile {
         const std::filesystem::space_info memory = std::filesystem::space("/dev/shm", none);
         if (none || memory.available < kRoomInMemory) return;
         std::string pattern = "/dev/shm/pinwell-volume-XXXXXX";
-        const foundation::FileDescriptor file(mkostemp(pattern.data(), O_CLOEXEC));
+        const base::FileDescriptor file(mkostemp(pattern.data(), O_CLOEXEC));
         if (file) path = pattern;
     }
     ~BackingFile() { ::unlink(path.c_str()); }

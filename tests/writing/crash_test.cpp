@@ -15,11 +15,11 @@
 
 #include "e2e/artefacts.h"
 #include "e2e/fixture.h"
-#include "foundation/format.h"
 #include "support/environment.h"
 #include "support/package_builder.h"
 #include "support/volume.h"
 #include "system_call_trace.h"
+#include "values/format.h"
 
 namespace pinwell::test {
 namespace {
@@ -85,7 +85,7 @@ class Crash : InMemory, public EndToEndTest, public testing::WithParamInterface<
                 EXPECT_TRUE(scene.look() == scene.after);
                 break;
             }
-            SCOPED_TRACE(foundation::format("at call %lu, %@", number, *run.interruptedAt));
+            SCOPED_TRACE(values::format("at call %lu, %@", number, *run.interruptedAt));
             EXPECT_EQ(run.signal, signal);
             ++tally.points;
             tally.calls.insert(*run.interruptedAt);
@@ -153,10 +153,10 @@ class Crash : InMemory, public EndToEndTest, public testing::WithParamInterface<
                                          if (wasStapled) stapleByHand(ticketForOthers());
                                      },
                                  .look = [&]() -> std::optional<std::string> {
-                                     if (const auto now = stapled()) return foundation::toString(*now);
+                                     if (const auto now = stapled()) return base::toString(*now);
                                      return std::nullopt;
                                  },
-                                 .after = foundation::toString(fresh),
+                                 .after = base::toString(fresh),
                                  .repair = [] {}},
                                 signal);
             if (HasFailure()) return;
@@ -178,7 +178,7 @@ class Crash : InMemory, public EndToEndTest, public testing::WithParamInterface<
             EXPECT_TRUE(now.starts_with(artefact.contents));
             return;  // the next staple appends a new chain after any bytes
         }
-        EXPECT_TRUE(now.starts_with(foundation::toString(irregularData(100'000))));
+        EXPECT_TRUE(now.starts_with(base::toString(irregularData(100'000))));
         restore(artefact.path, ".dmgData");
     }
 
@@ -221,11 +221,11 @@ TEST_P(Crash, LosesNoTrailersOfAPackage) {
     if (const auto reason = missing()) GTEST_SKIP() << *reason;
     const Artefact package = writeArtefact(signedPackage(), volume_ / "Sample.pkg");
     const auto withChain = [&](PackageBuilder chain) { return package.contents + chain.archive({}).build(); };
-    const std::string older = foundation::toString(sealed(package.payload().entry(2, hashOf(1))));
+    const std::string older = base::toString(sealed(package.payload().entry(2, hashOf(1))));
     const Data ticket = sealed(package.payload());
     const std::string before = withChain(PackageBuilder().terminator().ticket(older).unknown("KEPT"));
     const std::string after =
-        withChain(PackageBuilder().terminator().unknown("KEPT").ticket(foundation::toString(ticket)));
+        withChain(PackageBuilder().terminator().unknown("KEPT").ticket(base::toString(ticket)));
     interruptEverywhere({.path = package.path,
                          .ticket = ticket,
                          .prepare =
@@ -296,7 +296,7 @@ class ChangedWhileRead : public Crash {
                                                    [&](int, int) { change(artefact.path); });
                 if (!run.interruptedAt) break;
                 ++changes;
-                SCOPED_TRACE(foundation::format("%@ at call %lu, %@", made.name, number, *run.interruptedAt));
+                SCOPED_TRACE(values::format("%@ at call %lu, %@", made.name, number, *run.interruptedAt));
                 ASSERT_TRUE(run.exitStatus.has_value());
                 EXPECT_THAT(*run.exitStatus, AnyOf(0, 65, 66, 73));
                 if (*run.exitStatus == 0) expectOneAfterTheOther(artefact, ticket, change);

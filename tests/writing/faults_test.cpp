@@ -9,8 +9,6 @@
 #include <iostream>
 #include <map>
 
-#include "foundation/format.h"
-#include "foundation/url.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/platform.h"
 #include "stapling.h"
@@ -21,6 +19,8 @@
 #include "support/package_builder.h"
 #include "support/process.h"
 #include "support/volume.h"
+#include "values/format.h"
+#include "values/url.h"
 
 #include <gmock/gmock.h>
 
@@ -60,7 +60,7 @@ Subject bundleIn(const std::string& directory) {
             .hash = codeHashOf(2, codeDirectory),
             .contentsWith = [](const std::optional<Data>& ticket) -> std::optional<std::string> {
                 if (!ticket) return std::nullopt;
-                return foundation::toString(*ticket);
+                return base::toString(*ticket);
             },
             .isBundle = true};
 }
@@ -72,7 +72,7 @@ Subject fileIn(const std::string& directory, const Artefact& artefact, const std
     return {.name = name,
             .path = path,
             .file = path,
-            .data = isImage ? foundation::toString(data) : artefact.contents,
+            .data = isImage ? base::toString(data) : artefact.contents,
             .hash = artefact.hash,
             .contentsWith = [artefact](const std::optional<Data>& ticket) -> std::optional<std::string> {
                 return ticket ? artefact.stapledWith(*ticket) : artefact.contents;
@@ -174,8 +174,7 @@ class WriteFaults : public testing::TestWithParam<const char*> {
         if (clones() && volume_.missing()) return volume_.missing();
         writeFile(place_ + "/probe", std::string_view("probe"));
         const auto manager = files::makeLocalFileManager(plainTypeNaming);
-        const auto answer =
-            manager->volumeSupportsCloning(foundation::URL::fileURLWithPath(place_ + "/probe"));
+        const auto answer = manager->volumeSupportsCloning(values::URL::fileURLWithPath(place_ + "/probe"));
         std::filesystem::remove(place_ + "/probe");
         if (!answer || *answer != clones()) return "no volume here to write in place on";
         return std::nullopt;
@@ -208,8 +207,8 @@ class WriteFaults : public testing::TestWithParam<const char*> {
             outcome = job.after ? stapling.staple(subject.path, *job.after) : stapling.erase(subject.path);
             failed = trouble.failedCall();
         }
-        SCOPED_TRACE(foundation::format("%@ of a %@, %@ at call %lu, %@\n%@", job.name, subject.name,
-                                        fault.name, number, failed, testing::PrintToString(outcome)));
+        SCOPED_TRACE(values::format("%@ of a %@, %@ at call %lu, %@\n%@", job.name, subject.name, fault.name,
+                                    number, failed, testing::PrintToString(outcome)));
         ++tally.runs;
         check(subject, job, outcome, tally);
         if (outcome.status == kExitOK && !outcome.says(kSwapFailed) && failed != "rmdir" &&
@@ -243,9 +242,8 @@ class WriteFaults : public testing::TestWithParam<const char*> {
             EXPECT_THAT(outcome.status, AnyOf(kExitDataError, kExitNoInput, kExitNoHost, kExitCannotCreate));
             EXPECT_TRUE(outcome.status != kExitCannotCreate || saysWhyItWasNotWritten(outcome));
             if (job.after && outcome.says("Downloaded ticket has been stored at")) {
-                EXPECT_EQ(
-                    outcome.lines.back(),
-                    foundation::format("The staple and validate action failed! Error %d.", outcome.status));
+                EXPECT_EQ(outcome.lines.back(),
+                          values::format("The staple and validate action failed! Error %d.", outcome.status));
             }
         }
         if (now == after) {
@@ -264,7 +262,7 @@ class WriteFaults : public testing::TestWithParam<const char*> {
     static bool isAppended(const Job& job, const std::optional<std::string>& before,
                            const std::optional<std::string>& now) {
         if (!job.before || !job.after || !before || !now) return false;
-        const auto chain = PackageBuilder().archive({}).terminator().ticket(foundation::toString(*job.after));
+        const auto chain = PackageBuilder().archive({}).terminator().ticket(base::toString(*job.after));
         return *now == *before + chain.build();
     }
 
@@ -299,7 +297,7 @@ class WriteFaults : public testing::TestWithParam<const char*> {
         }
         // A package's tail is only the ticket, which is saved: the same run, once more.
         if (job.after) {
-            EXPECT_EQ(readFile(temporary_ + "/REQUEST.ticket"), foundation::toString(*job.after));
+            EXPECT_EQ(readFile(temporary_ + "/REQUEST.ticket"), base::toString(*job.after));
         }
         const Data ticket = job.after.value_or(unsignedTicket({subject.hash}));
         EXPECT_EQ(Stapling(temporary_).staple(subject.path, ticket).status, kExitOK);
@@ -403,7 +401,7 @@ class DeletionFaults : public testing::Test {
 
   protected:
     const Subject bundle_ = bundleIn(directory_.path());
-    const std::string ticket_ = foundation::toString(unsignedTicket({bundle_.hash}));
+    const std::string ticket_ = base::toString(unsignedTicket({bundle_.hash}));
     const std::map<std::string, std::string> rest_ = rest();
 };
 
@@ -415,8 +413,8 @@ TEST_F(DeletionFaults, LeaveABundlesTicketWholeInItsPlaceOrInTheTrash) {
             const Deletion deletion = eraseWith([&] { return fault.at(number); });
             const Outcome& outcome = deletion.outcome;
             failed = deletion.failedCall;
-            SCOPED_TRACE(foundation::format("%@ at call %lu, %@\n%@", fault.name, number, failed,
-                                            testing::PrintToString(outcome)));
+            SCOPED_TRACE(values::format("%@ at call %lu, %@\n%@", fault.name, number, failed,
+                                        testing::PrintToString(outcome)));
             if (isKeptWhole()) {
                 EXPECT_FALSE(deletion.done);
                 EXPECT_TRUE(outcome.status == kExitNoInput || outcome.says(kNotTrashed));
@@ -478,12 +476,11 @@ TEST_P(WriteFaults, LoseNoTrailersOfAPackage) {
         };
         Subject package = fileIn(place, signedPackage(sampleData()), "package with trailers", {});
         package.contentsWith = [=](const std::optional<Data>& ticket) {
-            return withChain(
-                PackageBuilder().terminator().ticket(foundation::toString(*ticket)).unknown("KEPT"));
+            return withChain(PackageBuilder().terminator().ticket(base::toString(*ticket)).unknown("KEPT"));
         };
         package.afterWith = [=](const std::optional<Data>& ticket) {
             PackageBuilder chain = PackageBuilder().terminator().unknown("KEPT");
-            return withChain(ticket ? chain.ticket(foundation::toString(*ticket)) : chain);
+            return withChain(ticket ? chain.ticket(base::toString(*ticket)) : chain);
         };
         return package;
     });

@@ -15,9 +15,9 @@
 #include <filesystem>
 #include <functional>
 
+#include "base/handle.h"
 #include "e2e/artefacts.h"
 #include "e2e/fixture.h"
-#include "foundation/file_io.h"
 #include "support/disk_image_builder.h"
 #include "support/file_properties.h"
 #include "support/file_size_limit.h"
@@ -234,7 +234,7 @@ class Immutable {
         return ioctl(file_.get(), FS_IOC_SETFLAGS, &flags) == 0;
     }
 
-    foundation::FileDescriptor file_;
+    base::FileDescriptor file_;
     bool set_ = false;
 };
 
@@ -366,8 +366,7 @@ TEST_P(Unwritable, AFullVolumeKeepsTheFileAsItIs) {
     const auto before = ticketFile();
     serveTicket(sealed(artefact.payload().entry(2, hashOf(1)).entry(2, hashOf(2))));
     std::string filler(1 << 20, 'x');
-    const foundation::FileDescriptor file(
-        open((volume / "filler").c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600));
+    const base::FileDescriptor file(open((volume / "filler").c_str(), O_WRONLY | O_CREAT | O_CLOEXEC, 0600));
     for (std::size_t size = filler.size(); size >= 512; size /= 2)
         while (write(file.get(), filler.data(), size) > 0) {
         }
@@ -471,11 +470,11 @@ TEST_F(OddArtefact, ASignedImageOf8TiBIsStapledWithoutBeingRead) {
     const Volume volume("xfs");
     if (volume.missing()) GTEST_SKIP() << *volume.missing();
     const std::string image = volume / "Huge.dmg";
-    const std::string tail = foundation::toString(
+    const std::string tail = base::toString(
         DiskImageBuilder().data({}).superblob(DiskImageBuilder::signature()).codeSignOffset(kSize).build());
     writeFile(image, std::string_view());
     const auto putAt = [&](std::uint64_t at, const std::string& bytes) {
-        const foundation::FileDescriptor file(open(image.c_str(), O_WRONLY | O_CLOEXEC));
+        const base::FileDescriptor file(open(image.c_str(), O_WRONLY | O_CLOEXEC));
         return pwrite(file.get(), bytes.data(), bytes.size(), static_cast<off_t>(at)) ==
                static_cast<ssize_t>(bytes.size());
     };

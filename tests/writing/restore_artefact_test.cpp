@@ -35,7 +35,7 @@ class RestoreArtefact : public testing::Test {
     const std::string copy = directory / "Image.dmgData";
     const Data data = irregularData(10'000);
     const Artefact artefact = signedImage(data);
-    const std::string stapled = artefact.stapledWith(foundation::toData("TICKET"));
+    const std::string stapled = artefact.stapledWith(base::toData("TICKET"));
     const std::string tail = stapled.substr(data.size());
     const std::string before = artefact.contents;
 
@@ -50,7 +50,7 @@ TEST_F(RestoreArtefact, MakesTheSameImageAsTheStaple) {
          {std::size_t{0}, std::size_t{1}, tail.size() / 2, tail.size() - 1, tail.size()}) {
         const std::string old = before.substr(data.size());
         writeFile(image,
-                  foundation::toString(data) + tail.substr(0, half) + old.substr(std::min(half, old.size())));
+                  base::toString(data) + tail.substr(0, half) + old.substr(std::min(half, old.size())));
         const ProcessResult result = restore({image, copy});
         EXPECT_EQ(result.exitStatus, 0) << result.errors;
         EXPECT_EQ(result.output, "");

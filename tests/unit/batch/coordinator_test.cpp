@@ -13,8 +13,8 @@
 #include <filesystem>
 #include <map>
 
+#include "base/text.h"
 #include "batch/selection.h"
-#include "foundation/base64.h"
 #include "retrieval/ticket_fetch.h"
 #include "src/DownloadDelegate.h"
 #include "support/answering_sessions.h"
@@ -47,8 +47,8 @@ Reply ticketsFor(const Names& names) {
     for (const std::string& name : names) {
         const auto hash = retrieval::hashInRecordName(name);
         records += (records.empty() ? "" : ",") + (R"({"recordName":")" + name) +
-                   R"(","fields":{"signedTicket":{"value":")" +
-                   foundation::encodeBase64(unsignedTicket({*hash})) + R"("}}})";
+                   R"(","fields":{"signedTicket":{"value":")" + base::encodeBase64(unsignedTicket({*hash})) +
+                   R"("}}})";
     }
     return {.body = R"({"records":[)" + records + "]}"};
 }
@@ -72,8 +72,8 @@ class Coordination : public testing::Test {
         std::array<int, 2> ends{};
         if (::pipe2(ends.data(), O_CLOEXEC | O_NONBLOCK) != 0)
             throw std::system_error(errno, std::generic_category(), "pipe2");
-        signals = foundation::FileDescriptor(ends[0]);
-        signalsEnd = foundation::FileDescriptor(ends[1]);
+        signals = base::FileDescriptor(ends[0]);
+        signalsEnd = base::FileDescriptor(ends[1]);
     }
 
     void sendSignal(int number) const {
@@ -93,14 +93,14 @@ class Coordination : public testing::Test {
         }
         return paths;
     }
-    static foundation::Data hashOf(std::size_t number) {
+    static base::Data hashOf(std::size_t number) {
         std::string hash = hashTextOf(number);
         hash.resize(kBundleHashLength, '.');
-        return foundation::toData(hash);
+        return base::toData(hash);
     }
     bool carriesItsTicket(std::size_t number) const {
         return readFile(pathOf(number) + "/Contents/CodeResources") ==
-               foundation::toString(unsignedTicket({hashOf(number)}));
+               base::toString(unsignedTicket({hashOf(number)}));
     }
 
     /// Fills `reports`, in the order of their ends. Returns the signal that ended it.
@@ -124,8 +124,8 @@ class Coordination : public testing::Test {
     HashByExecutable codeSigning;
     AnsweringSessions sessions{&ticketsForAll};
     Settings settings;
-    foundation::FileDescriptor signals;
-    foundation::FileDescriptor signalsEnd;
+    base::FileDescriptor signals;
+    base::FileDescriptor signalsEnd;
     std::function<bool(const std::string&)> isWanted = [](const std::string&) { return true; };
     std::function<bool(const std::string&, const retrieval::ArtefactRun&)> isDoneBefore =
         [](const std::string&, const retrieval::ArtefactRun&) { return false; };
@@ -176,7 +176,7 @@ TEST_F(Coordination, AnArtefactChangedDuringTheLookupIsLookedUpAgain) {
     run(paths);
     EXPECT_THAT(reports, ElementsAre(Ended(Cause::worked, 0, 2)));
     EXPECT_EQ(readFile(paths[0] + "/Contents/CodeResources"),
-              foundation::toString(unsignedTicket({foundation::toData("built anew..........")})));
+              base::toString(unsignedTicket({base::toData("built anew..........")})));
 }
 
 TEST_F(Coordination, TellsTheStateOfTheFilesAsTheRunLeftThem) {

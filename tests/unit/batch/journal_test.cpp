@@ -27,7 +27,7 @@ JournalItem validation(const std::string& path) {
     return item;
 }
 
-foundation::Result<void> addWorked(Journal&& journal, const JournalItem& item) {
+base::Result<void> addWorked(Journal&& journal, const JournalItem& item) {
     return journal.add(item, 0, Cause::worked);
 }
 

@@ -2,17 +2,17 @@
 #include <xar/xar.h>
 
 #include "allocation_count.h"
-#include "foundation/xml_parser.h"
 #include "support/archive_builder.h"
 #include "support/temporary_directory.h"
 #include "support/text.h"
+#include "values/xml_parser.h"
 #include "xar/inflater.h"
 #include "xar/table_of_contents.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::asBytes;
+using base::asBytes;
 
 std::string inTable(const std::string& contents) {
     return "<xar><toc>" + contents + "</toc></xar>";
@@ -37,7 +37,7 @@ TEST(BoundedWork, StreamThatInflatesAThousandfoldIsLeftAtTheLimit) {
     ASSERT_LT(stream.size(), kLimit / 8);
     std::size_t had = 0;
     const AllocationCount count;
-    xar::Inflater inflater(kLimit, [&](foundation::ByteView piece) {
+    xar::Inflater inflater(kLimit, [&](base::ByteView piece) {
         had += piece.size();
         return true;
     });
@@ -77,7 +77,7 @@ TEST(BoundedWork, TableOfAMillionNamesIsLeftAtTheLimit) {
 
 TEST(BoundedWork, TableWithACommentOfSixteenMebibytesIsLeftAtTheLimit) {
     EXPECT_LE(takenOf("<!--" + std::string(16 * kMebibyte, 'c') + "-->" + inTable("")),
-              foundation::kMaximumXMLMemory);
+              values::kMaximumXMLMemory);
 }
 
 // Ignored elements are not stored.

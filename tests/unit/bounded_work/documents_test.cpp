@@ -1,19 +1,19 @@
 #include <gtest/gtest.h>
 
 #include "allocation_count.h"
-#include "foundation/base64.h"
-#include "foundation/description.h"
-#include "foundation/json.h"
-#include "foundation/property_list.h"
-#include "foundation/value.h"
+#include "base/text.h"
 #include "support/text.h"
+#include "values/format.h"
+#include "values/json.h"
+#include "values/property_list.h"
+#include "values/value.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::asBytes;
-using foundation::parseJSON;
-using foundation::parsePropertyList;
+using base::asBytes;
+using values::parseJSON;
+using values::parsePropertyList;
 
 // A container or value is some hundred bytes, and a list of them grows by doubling.
 constexpr std::size_t kBytesPerValue = 1024;
@@ -23,25 +23,25 @@ TEST(BoundedWork, JSONNestedAMillionDeepIsLeftAtTheLimit) {
         const std::string document = repeated(opening, 1'000'000);
         const AllocationCount count;
         EXPECT_FALSE(parseJSON(asBytes(document)));
-        EXPECT_LE(count.bytes(), foundation::kMaximumJSONDepth * kBytesPerValue);
+        EXPECT_LE(count.bytes(), values::kMaximumJSONDepth * kBytesPerValue);
     }
 }
 
 TEST(BoundedWork, JSONOfMillionsOfValuesIsLeftAtTheLimit) {
-    const std::string document = "[" + repeated("0,", 8 * foundation::kMaximumJSONValues) + "0]";
+    const std::string document = "[" + repeated("0,", 8 * values::kMaximumJSONValues) + "0]";
     const AllocationCount count;
     EXPECT_FALSE(parseJSON(asBytes(document)));
-    EXPECT_LE(count.largest(), foundation::kMaximumJSONValues * 128);
-    EXPECT_LE(count.bytes(), foundation::kMaximumJSONValues * 256);
+    EXPECT_LE(count.largest(), values::kMaximumJSONValues * 128);
+    EXPECT_LE(count.bytes(), values::kMaximumJSONValues * 256);
 }
 
 // Each pair of brackets is a value: the costliest for its length.
 TEST(BoundedWork, JSONOfTheMostContainersTakesAFixedAmountForEach) {
-    const std::string document = "[" + repeated("[0],", foundation::kMaximumJSONValues / 2 - 2) + "0]";
+    const std::string document = "[" + repeated("[0],", values::kMaximumJSONValues / 2 - 2) + "0]";
     const AllocationCount count;
     EXPECT_TRUE(parseJSON(asBytes(document)));
-    EXPECT_LE(count.blocks(), foundation::kMaximumJSONValues * 4);
-    EXPECT_LE(count.bytes(), foundation::kMaximumJSONValues * kBytesPerValue);
+    EXPECT_LE(count.blocks(), values::kMaximumJSONValues * 4);
+    EXPECT_LE(count.bytes(), values::kMaximumJSONValues * kBytesPerValue);
 }
 
 TEST(BoundedWork, JSONNumberOfAMillionDigitsTakesAFixedAmountForEachDigit) {
@@ -53,38 +53,37 @@ TEST(BoundedWork, JSONNumberOfAMillionDigitsTakesAFixedAmountForEachDigit) {
 
 TEST(BoundedWork, DescriptionGrowsWithItsValueAndNotWithItsDepth) {
     constexpr std::size_t kValues = 100'000;
-    constexpr unsigned kDepth = foundation::kMaximumJSONDepth;
+    constexpr unsigned kDepth = values::kMaximumJSONDepth;
     const std::string document =
         repeated("[", kDepth) + repeated("0,", kValues) + "0" + repeated("]", kDepth);
     const auto value = parseJSON(asBytes(document));
     ASSERT_TRUE(value);
     const AllocationCount count;
-    EXPECT_LE(foundation::describe(*value).size(), 256 * (kValues + kDepth));
+    EXPECT_LE(values::describe(*value).size(), 256 * (kValues + kDepth));
     EXPECT_LE(count.bytes(), 4 * 256 * (kValues + kDepth));
 }
 
 TEST(BoundedWork, Base64TakesNoMoreThanItsText) {
     const std::string text = repeated("AAAA", 4 * kMebibyte);
     const AllocationCount count;
-    EXPECT_TRUE(foundation::decodeBase64(text));
+    EXPECT_TRUE(base::decodeBase64(text));
     EXPECT_LE(count.bytes(), 2 * text.size());
 }
 
 TEST(BoundedWork, PropertyListNestedToItsLimitOfLengthIsRefused) {
-    const std::string document = "<plist>" + repeated("<array>", foundation::kMaximumPropertyListSize / 8);
+    const std::string document = "<plist>" + repeated("<array>", values::kMaximumPropertyListSize / 8);
     const AllocationCount count;
     EXPECT_FALSE(parsePropertyList(asBytes(document)));
     EXPECT_LE(count.bytes(), 3 * document.size());
 }
 
 TEST(BoundedWork, PropertyListOfTooManyValuesIsLeftAtTheLimit) {
-    const std::string document = "<plist><array>" +
-                                 repeated("<true/>", foundation::kMaximumPropertyListValues + 1) +
-                                 "</array></plist>";
+    const std::string document =
+        "<plist><array>" + repeated("<true/>", values::kMaximumPropertyListValues + 1) + "</array></plist>";
     const AllocationCount count;
     EXPECT_FALSE(parsePropertyList(asBytes(document)));
-    EXPECT_LE(count.largest(), foundation::kMaximumPropertyListValues * 64);
-    EXPECT_LE(count.bytes(), foundation::kMaximumPropertyListValues * 128);
+    EXPECT_LE(count.largest(), values::kMaximumPropertyListValues * 64);
+    EXPECT_LE(count.bytes(), values::kMaximumPropertyListValues * 128);
 }
 
 TEST(BoundedWork, PropertyListWithEntitiesThatUnfoldIsRefused) {

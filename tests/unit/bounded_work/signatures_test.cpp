@@ -1,23 +1,22 @@
 #include <gtest/gtest.h>
 
 #include "allocation_count.h"
+#include "base/byte_io.h"
 #include "codesign/cms_signature.h"
 #include "codesign/code_directory.h"
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
 #include "codesign/superblob.h"
 #include "formats/superblob.h"
-#include "foundation/byte_reader.h"
-#include "foundation/byte_writer.h"
 #include "support/code_directory_builder.h"
 #include "support/executable_image_builder.h"
 
 namespace pinwell::test {
 namespace {
 
+using base::ByteWriter;
+using base::ShortRead;
 using codesign::CodeError;
-using foundation::ByteWriter;
-using foundation::ShortRead;
 
 // Enough for an error message.
 constexpr std::size_t kRefusal = 4 * kKibibyte;
@@ -179,7 +178,7 @@ TEST(BoundedWork, LoadCommandsOfNoLengthAreNotWalkedForEver) {
 }
 
 TEST(BoundedWork, CmsMessageThatClaimsFourGibibytesIsRefused) {
-    const Data message = foundation::toData(std::string_view("\x30\x84\xFF\xFF\xFF\xFF\x06\x09", 8));
+    const Data message = base::toData(std::string_view("\x30\x84\xFF\xFF\xFF\xFF\x06\x09", 8));
     const AllocationCount count;
     EXPECT_TRUE(isRefused([&] { codesign::requireDetachedCms(message, {}); }));
     EXPECT_EQ(codesign::secureTimestamp(message), std::nullopt);

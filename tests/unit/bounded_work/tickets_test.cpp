@@ -11,7 +11,7 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::Data;
+using base::Data;
 
 TEST(BoundedWork, TicketOfTheMostEntriesTakesOneBlockOfItsSize) {
     constexpr std::size_t kEntries = (kTicketMaximumSize - kTicketHeaderSize) / 20;
@@ -42,7 +42,7 @@ TEST(BoundedWork, TicketThatClaimsFourBillionEntriesTakesNothing) {
 TEST(BoundedWork, ContainerThatClaimsEightGibibytesTakesNothing) {
     const Data container = SatchelBuilder()
                                .certificate(derElement(0x30, {}))
-                               .payload(foundation::toData("payload"))
+                               .payload(base::toData("payload"))
                                .certificateBlockLength(~0U)
                                .payloadLength(~0U)
                                .build();
@@ -55,7 +55,7 @@ TEST(BoundedWork, ContainerThatClaimsEightGibibytesTakesNothing) {
 TEST(BoundedWork, BlockOfAMillionCertificatesIsLeftAfterThree) {
     Data elements;
     const Data element = derElement(0x30, {});
-    for (int i = 0; i < 1'000'000; ++i) foundation::append(elements, element);
+    for (int i = 0; i < 1'000'000; ++i) base::append(elements, element);
     const Data block = derElement(0x30, elements);
     FakeTrustService service;
     std::vector<trust::CertificateRef> certificates;
@@ -64,10 +64,10 @@ TEST(BoundedWork, BlockOfAMillionCertificatesIsLeftAfterThree) {
 }
 
 TEST(BoundedWork, CertificateOfFourGibibytesIsNotLookedFor) {
-    const Data block = SatchelBuilder()
-                           .certificateBlock(derElement(
-                               0x30, foundation::toData(std::string_view("\x30\x84\xFF\xFF\xFF\xFF", 6))))
-                           .build();
+    const Data block =
+        SatchelBuilder()
+            .certificateBlock(derElement(0x30, base::toData(std::string_view("\x30\x84\xFF\xFF\xFF\xFF", 6))))
+            .build();
     FakeTrustService service;
     std::vector<trust::CertificateRef> certificates;
     EXPECT_NE(_satchel_copy_certificates(block, &certificates, service), satchel_status::kSuccess);

@@ -4,17 +4,17 @@
 
 #include <span>
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 #include "service_fixture.h"
 #include "support/disk_image_builder.h"
 
 namespace pinwell::test {
 namespace {
 
+using base::ByteWriter;
 using codesign::kSuccess;
 using codesign::layOutOpaqueCodeDirectory;
 using codesign::OpaqueSignature;
-using foundation::ByteWriter;
 
 /// SHA-256 of FADE0C01 0000000C 00000000.
 const Data kEmptyRequirementsDigest = codeDigest(2, emptyRequirements());
@@ -139,7 +139,7 @@ class AdHocSigning : public CodeSigningTest {
         EXPECT_EQ(statusOf(service.addSignature(*signer, *code, 0)), kSuccess);
         EXPECT_EQ(statusOf(service.setDetachedSignature(*code, *parameters.detachedSignature, 0)), kSuccess);
         EXPECT_EQ(statusOf(service.checkValidity(*code, kValidityFlags)), kSuccess);
-        EXPECT_EQ(readFile(scratch / "image"), foundation::toString(contents));
+        EXPECT_EQ(readFile(scratch / "image"), base::toString(contents));
         return informationOf(*code, codesign::kSigningInformation);
     }
 };
@@ -176,7 +176,7 @@ TEST_F(AdHocSigning, CoversASignatureAreaThatDoesNotEndAtTheTrailer) {
     const Data content(1000, std::byte{0x42});
     const Data trailer = DiskImageBuilder().codeSignOffset(900).codeSignLength(99).trailer();
     Data file = content;
-    foundation::append(file, trailer);
+    base::append(file, trailer);
     const Data codeDirectory = layOutOpaqueCodeDirectory(
         {"ADHOC", 1000, codeDigest(2, DiskImageBuilder().trailer()), codeDigest(2, content)});
     EXPECT_EQ(sign(file).unique, codeHashOf(2, codeDirectory));

@@ -19,7 +19,7 @@ class AllCodeHashes : public CodeSigningTest {
   protected:
     /// The identifiers found, in order.
     std::vector<std::string> identifiersAt(const std::string& path, codesign::Status expected = kSuccess) {
-        const auto all = service.allCodeHashes(foundation::URL::fileURLWithPath(path));
+        const auto all = service.allCodeHashes(values::URL::fileURLWithPath(path));
         EXPECT_EQ(statusOf(all), expected);
         std::vector<std::string> identifiers;
         if (!all) return identifiers;
@@ -72,13 +72,13 @@ TEST_F(AllCodeHashes, IncludeNestedCodeWhereverItLies) {
                             .file("Contents/Frameworks/libone.dylib", imageNamed("one"))
                             .file("Contents/Helpers/helper", imageNamed("helper"))
                             .file("Contents/PlugIns/Deep.bundle/Contents/Programs/Deep", imageNamed("deep"))
-                            .file("Contents/Resources/text.txt", foundation::toData("text"));
+                            .file("Contents/Resources/text.txt", base::toData("text"));
     EXPECT_EQ(identifiersIn(bundle), (Identifiers{"com.example.sample", "kit", "one", "helper", "deep"}));
 }
 
 TEST_F(AllCodeHashes, IncludeANestedBundleInTheSeparateForm) {
     BundleBuilder()
-        .executable(foundation::toData("#!/bin/sh\n"))
+        .executable(base::toData("#!/bin/sh\n"))
         .separateSignature(codeDirectoryNamed("script"), {}, {})
         .write(scratch / "Sample.app/Contents/PlugIns/Inner.bundle");
     EXPECT_EQ(identifiersIn(BundleBuilder()), (Identifiers{"com.example.sample", "script"}));

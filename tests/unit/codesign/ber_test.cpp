@@ -4,14 +4,15 @@
 
 #include <string>
 
+#include "base/byte_io.h"
+#include "base/text.h"
 #include "codesign/code_error.h"
-#include "foundation/byte_writer.h"
 
 namespace pinwell::codesign::ber {
 namespace {
 
-using foundation::toData;
-using foundation::toHex;
+using base::toData;
+using base::toHex;
 
 Data hex(std::string_view digits) {
     Data data;
@@ -118,7 +119,7 @@ TEST(BerElement, RefusesAnEndWithoutABeginning) {
 }
 
 Data nested(std::size_t levels) {
-    foundation::ByteWriter writer;
+    base::ByteWriter writer;
     for (std::size_t i = 0; i < levels; ++i) writer.be16(0x3080);
     for (std::size_t i = 0; i < levels; ++i) writer.be16(0);
     return std::move(writer).take();

@@ -16,13 +16,13 @@
 namespace pinwell::test {
 namespace {
 
+using base::ByteView;
+using base::Data;
 using codesign::CodeError;
 using codesign::kReadAheadPieces;
 using codesign::kReadAheadPieceSize;
 using codesign::MemorySource;
 using codesign::ReadAhead;
-using foundation::ByteView;
-using foundation::Data;
 
 constexpr std::uint64_t kNever = ~std::uint64_t{0};
 
@@ -60,8 +60,7 @@ bool isFilledWith(ByteView bytes, std::uint64_t number) {
 
 Data allOf(ReadAhead& pieces) {
     Data bytes;
-    for (ByteView piece = pieces.next(); !piece.empty(); piece = pieces.next())
-        foundation::append(bytes, piece);
+    for (ByteView piece = pieces.next(); !piece.empty(); piece = pieces.next()) base::append(bytes, piece);
     return bytes;
 }
 
@@ -69,7 +68,7 @@ TEST(ReadAhead, GivesAllBytesInTheirOrder) {
     for (const std::size_t size :
          {std::size_t{0}, std::size_t{1}, kReadAheadPieceSize - 1, kReadAheadPieceSize,
           kReadAheadPieceSize + 1, 3 * kReadAheadPieceSize, 3 * kReadAheadPieces * kReadAheadPieceSize + 7}) {
-        const Data bytes = foundation::toData(irregularBytes(size));
+        const Data bytes = base::toData(irregularBytes(size));
         const MemorySource source(bytes);
         ReadAhead pieces(source, size);
         EXPECT_TRUE(allOf(pieces) == bytes) << size;
@@ -78,10 +77,10 @@ TEST(ReadAhead, GivesAllBytesInTheirOrder) {
 }
 
 TEST(ReadAhead, StopsBeforeItsEnd) {
-    const Data bytes = foundation::toData(irregularBytes(2 * kReadAheadPieceSize + 100));
+    const Data bytes = base::toData(irregularBytes(2 * kReadAheadPieceSize + 100));
     const MemorySource source(bytes);
     ReadAhead pieces(source, kReadAheadPieceSize + 50);
-    EXPECT_TRUE(allOf(pieces) == foundation::toData(ByteView(bytes).first(kReadAheadPieceSize + 50)));
+    EXPECT_TRUE(allOf(pieces) == base::toData(ByteView(bytes).first(kReadAheadPieceSize + 50)));
 }
 
 TEST(ReadAhead, ReadsManyPiecesOnAThreadOfItsOwn) {
@@ -139,7 +138,7 @@ TEST(ReadAhead, RethrowsAReadersExceptionAfterThePiecesBeforeIt) {
 TEST(ReadAhead, OfAFileThatBecameShorterFails) {
     const TemporaryDirectory scratch;
     writeFile(scratch / "file", irregularBytes(3 * kReadAheadPieceSize));
-    const codesign::FileSource source(foundation::Places{}, scratch / "file");
+    const codesign::FileSource source(base::Places{}, scratch / "file");
     std::filesystem::resize_file(scratch / "file", kReadAheadPieceSize + 1);
     ReadAhead pieces(source, source.size());
     EXPECT_EQ(pieces.next().size(), kReadAheadPieceSize);

@@ -147,13 +147,13 @@ TEST(CmsMessage, HasNothingAfterItsParts) {
     const Data more = derElement(0x05, {});
     const std::string trailing = " has something after it";
     Data message = goodParts().build();
-    foundation::append(message, more);
+    base::append(message, more);
     EXPECT_EQ(refusalOf(message), "the signer's message" + trailing);
 
     const std::vector<Data> info = derElements(derContents(goodParts().build()));
     EXPECT_EQ(refusalOf(derElement(0x30, joined({info[0], info[1], more}))),
               "the signer's message" + trailing);
-    const Data fields = foundation::toData(derContents(derContents(info[1])));
+    const Data fields = base::toData(derContents(derContents(info[1])));
     EXPECT_EQ(refusalOf(derElement(
                   0x30, joined({info[0], derElement(0xA0, derElement(0x30, joined({fields, more})))}))),
               "the signer's message" + trailing);
@@ -162,7 +162,7 @@ TEST(CmsMessage, HasNothingAfterItsParts) {
               "the signer's message" + trailing);
     EXPECT_EQ(refusalOf(with([&](CmsParts& parts) {
                   signerOf(parts).unsignedAttributes.emplace();
-                  foundation::append(signerOf(parts).signature, derElement(0xA1, {}));
+                  base::append(signerOf(parts).signature, derElement(0xA1, {}));
               })),
               "the signer in the message" + trailing);
 }
@@ -247,7 +247,7 @@ TEST(CmsSigner, MayBeNamedByItsKeyIdentifier) {
 
 TEST(CmsSigner, NamedByAKeyIdentifierNeedsACertificateThatHasIt) {
     CmsParts parts = signedByExponentOne(2048, kContent);
-    signerOf(parts).identifier = derElement(0x80, foundation::asBytes("key"));
+    signerOf(parts).identifier = derElement(0x80, base::asBytes("key"));
     EXPECT_EQ(refusalOf(parts), "the signer's certificate is not in the message");
     parts.certificates = {certificateAround(rsaKeyOfExponentOne(2048), "kez"),
                           certificateAround(rsaKeyOfExponentOne(2048), "key")};
@@ -334,7 +334,7 @@ TEST(CmsSigner, MayHaveItsSignatureInPieces) {
 
 TEST(CmsSigner, RefusesASignatureOfAnyOtherLength) {
     CmsParts parts = signedByExponentOne(2048, kContent);
-    const Data value = foundation::toData(derContents(signerOf(parts).signature));
+    const Data value = base::toData(derContents(signerOf(parts).signature));
     for (const std::size_t length :
          {std::size_t{0}, value.size() - 1, value.size() + 1, std::size_t{1'000'000}}) {
         Data other = value;

@@ -9,7 +9,7 @@
 
 namespace pinwell::test {
 
-inline const Data kContent = foundation::toData("a code directory");
+inline const Data kContent = base::toData("a code directory");
 
 inline constexpr std::string_view kTimeStampContent = "\x2A\x86\x48\x86\xF7\x0D\x01\x09\x10\x01\x04";
 
@@ -22,7 +22,7 @@ inline CmsSignerParts& signerOf(CmsParts& parts) {
 }
 
 inline Data identifier(std::string_view contents) {
-    return derElement(0x06, foundation::asBytes(contents));
+    return derElement(0x06, base::asBytes(contents));
 }
 
 inline Data number(int value) {

@@ -9,7 +9,7 @@ namespace pinwell::test {
 namespace {
 
 using codesign::secureTimestamp;
-using foundation::Date;
+using values::Date;
 
 constexpr Date kStampedAt{1795204500};
 
@@ -39,7 +39,7 @@ TEST(CmsSignature, VerifiesWithoutSignedAttributes) {
 }
 
 TEST(CmsSignature, RefusesOtherContent) {
-    const Data other = foundation::toData("another directory");
+    const Data other = base::toData("another directory");
     EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kContent).build(), other));
     EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kContent).withoutSignedAttributes().build(), other));
     EXPECT_FALSE(verifyDetachedCms(CmsBuilder(kContent).ber().build(), other));
@@ -62,7 +62,7 @@ TEST(CmsSignature, RefusesAMessageThatCarriesItsContent) {
 TEST(CmsSignature, RefusesOtherContentThanSignedData) {
     EXPECT_FALSE(verifyDetachedCms({}, kContent));
     EXPECT_FALSE(verifyDetachedCms(Data(100), kContent));
-    EXPECT_FALSE(verifyDetachedCms(foundation::toData("0\x80"), kContent));
+    EXPECT_FALSE(verifyDetachedCms(base::toData("0\x80"), kContent));
     // A ContentInfo of plain data: SEQUENCE { 1.2.840.113549.1.7.1, [0] { OCTET STRING "" } }
     const unsigned char data[] = {0x30, 0x0F, 0x06, 0x09, 0x2A, 0x86, 0x48, 0x86, 0xF7,
                                   0x0D, 0x01, 0x07, 0x01, 0xA0, 0x02, 0x04, 0x00};
@@ -120,7 +120,7 @@ TEST(SecureTimestamp, IsNothingWhenTheTokenIsBroken) {
 }
 
 TEST(SecureTimestamp, IsNothingWhenTheImprintIsOfAnotherSignature) {
-    const auto token = TimestampBuilder().imprintOf(foundation::toData("another signature value"));
+    const auto token = TimestampBuilder().imprintOf(base::toData("another signature value"));
     EXPECT_EQ(secureTimestamp(CmsBuilder(kContent).timestamp(token).build()), std::nullopt);
 }
 

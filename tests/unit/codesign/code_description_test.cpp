@@ -114,7 +114,7 @@ TEST_F(Description, SaysThatASuperblobCannotBeParsedAndShowsItAllTheSame) {
 TEST_F(Description, ReadsASignatureInSeparateFiles) {
     const Data codeDirectory = CodeDirectoryBuilder().covers(2, test::emptyRequirements()).build();
     test::BundleBuilder()
-        .executable(foundation::toData("#!/bin/sh\n"))
+        .executable(base::toData("#!/bin/sh\n"))
         .separateSignature(codeDirectory, test::emptyRequirements(), {})
         .write(directory / "Script.app");
     const CodeDescription description = describeCode(directory / "Script.app");

@@ -2,19 +2,18 @@
 
 #include <gtest/gtest.h>
 
+#include "base/byte_io.h"
+#include "base/bytes.h"
 #include "codesign/code_error.h"
-#include "foundation/byte_reader.h"
-#include "foundation/byte_writer.h"
-#include "foundation/bytes.h"
-#include "foundation/format.h"
 #include "support/code_directory_builder.h"
+#include "values/format.h"
 
 namespace pinwell::test {
 namespace {
 
+using base::ShortRead;
 using codesign::CodeDirectory;
 using codesign::CodeError;
-using foundation::ShortRead;
 
 void expectRefused(const CodeDirectoryBuilder& builder) {
     const Data blob = builder.build();
@@ -41,7 +40,7 @@ TEST(CodeDirectory, HasTheValuesOfItsFields) {
     EXPECT_EQ(directory.flags(), 0x10002U);
     EXPECT_EQ(directory.version(), 0x20400U);
     EXPECT_EQ(directory.digestType(), codesign::DigestType::sha256);
-    EXPECT_EQ(foundation::toData(directory.bytes()), blob);
+    EXPECT_EQ(base::toData(directory.bytes()), blob);
 }
 
 struct Kind {
@@ -75,7 +74,7 @@ TEST_P(CodeDirectoryVersion, IsReadWithItsOwnHeader) {
 INSTANTIATE_TEST_SUITE_P(Accepted, CodeDirectoryVersion,
                          ::testing::Values(0x20001U, 0x200FFU, 0x20100U, 0x20200U, 0x20300U, 0x20400U,
                                            0x20500U, 0x20600U, 0x2FFFFU),
-                         [](const auto& version) { return foundation::format("Version%X", version.param); });
+                         [](const auto& version) { return values::format("Version%X", version.param); });
 
 TEST(CodeDirectory, RefusesVersionsOutsideItsRange) {
     expectRefused(CodeDirectoryBuilder().version(0x20000));
@@ -165,7 +164,7 @@ TEST(CodeDirectory, RefusesAPreEncryptionListOutsideOfIt) {
 }
 
 TEST(CodeDirectory, WalksItsScatterVectorToTheClosingRecord) {
-    const Data record = foundation::ByteWriter().be32(1).zeros(20).data();
+    const Data record = base::ByteWriter().be32(1).zeros(20).data();
     Data closed = record;
     closed.resize(48);
     EXPECT_NO_THROW(CodeDirectory::parse(CodeDirectoryBuilder().scatter(closed).build()));
@@ -200,7 +199,7 @@ TEST(CodeDirectory, EndsCleanlyWhereverItIsCut) {
     const Data whole =
         CodeDirectoryBuilder().version(0x20500).team("TEAM").covers(2, emptyRequirements()).build();
     for (std::size_t length = 0; length < whole.size(); ++length) {
-        EXPECT_ANY_THROW(CodeDirectory::parse(foundation::toData(ByteView(whole).first(length)))) << length;
+        EXPECT_ANY_THROW(CodeDirectory::parse(base::toData(ByteView(whole).first(length)))) << length;
     }
 }
 

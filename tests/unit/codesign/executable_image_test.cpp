@@ -2,14 +2,14 @@
 
 #include <gtest/gtest.h>
 
+#include "base/byte_io.h"
 #include "codesign/code_error.h"
-#include "foundation/byte_reader.h"
-#include "foundation/byte_writer.h"
 #include "support/executable_image_builder.h"
 
 namespace pinwell::test {
 namespace {
 
+using base::ShortRead;
 using codesign::CodeError;
 using codesign::FileRange;
 using codesign::findImageSignature;
@@ -17,7 +17,6 @@ using codesign::isExecutableImage;
 using codesign::MemorySource;
 using codesign::preferredSlice;
 using codesign::readSlices;
-using foundation::ShortRead;
 
 std::optional<FileRange> signatureOf(const Data& file) {
     const MemorySource source(file);
@@ -39,7 +38,7 @@ void expectRefused(const Data& file) {
 Data signatureBytes(const Data& file) {
     const std::optional<FileRange> range = signatureOf(file);
     if (!range) return {};
-    return foundation::toData(ByteView(file).subspan(range->offset, range->length));
+    return base::toData(ByteView(file).subspan(range->offset, range->length));
 }
 
 TEST(ThinImage, GivesItsSignatureInEitherByteOrderAndWidth) {
@@ -56,7 +55,7 @@ TEST(ThinImage, IsKnownByItsMagic) {
     EXPECT_TRUE(isExecutableImage(MemorySource(UniversalImageBuilder().build())));
     EXPECT_TRUE(isExecutableImage(MemorySource(UniversalImageBuilder().wide().build())));
     EXPECT_FALSE(isExecutableImage(MemorySource(ExecutableImageBuilder().magic(0xFEEDFACD).build())));
-    EXPECT_FALSE(isExecutableImage(MemorySource(foundation::toData("#!/bin/sh\n"))));
+    EXPECT_FALSE(isExecutableImage(MemorySource(base::toData("#!/bin/sh\n"))));
     EXPECT_FALSE(isExecutableImage(MemorySource(Data(3, std::byte{0xFE}))));
     EXPECT_FALSE(isExecutableImage(MemorySource(Data())));
 }
@@ -114,7 +113,7 @@ TEST(ThinImage, RefusesASignatureCommandOfAnotherSize) {
 }
 
 TEST(ThinImage, RefusesTwoSignatures) {
-    const Data other = foundation::ByteWriter().le32(200).le32(12).data();
+    const Data other = base::ByteWriter().le32(200).le32(12).data();
     expectRefused(ExecutableImageBuilder().loadCommand(0x1D, other).build());
 }
 

@@ -8,12 +8,12 @@
 #include <string>
 #include <vector>
 
+#include "base/bytes.h"
 #include "codesign/service.h"
-#include "foundation/bytes.h"
-#include "foundation/url.h"
 #include "support/executable_image_builder.h"
 #include "support/status.h"
 #include "support/temporary_directory.h"
+#include "values/url.h"
 
 namespace pinwell::test {
 
@@ -25,11 +25,11 @@ struct Answer {
     codesign::SigningInformation information;
 };
 
-inline foundation::Data codeDirectoryNamed(const std::string& identifier) {
+inline base::Data codeDirectoryNamed(const std::string& identifier) {
     return CodeDirectoryBuilder().identifier(identifier).build();
 }
 
-inline foundation::Data imageNamed(const std::string& identifier) {
+inline base::Data imageNamed(const std::string& identifier) {
     return ExecutableImageBuilder()
         .signature(SuperBlobBuilder::adHoc(codeDirectoryNamed(identifier)).build())
         .build();
@@ -42,13 +42,13 @@ class CodeSigningTest : public ::testing::Test {
 
     /// Bundles as BundleBuilder writes them by default; finding executables in others is not this service's
     /// matter.
-    static std::optional<std::string> sampleExecutable(foundation::Places&, const std::string& bundle) {
+    static std::optional<std::string> sampleExecutable(base::Places&, const std::string& bundle) {
         return bundle + "/Contents/Programs/Sample";
     }
 
     Answer ask(const std::string& path) {
         Answer answer;
-        const auto code = service.staticCode(foundation::URL::fileURLWithPath(path), 0);
+        const auto code = service.staticCode(values::URL::fileURLWithPath(path), 0);
         answer.created = statusOf(code);
         if (!code) return answer;
         answer.validity = statusOf(service.checkValidity(**code, kValidityFlags));
@@ -73,7 +73,7 @@ class CodeSigningTest : public ::testing::Test {
 
     TemporaryDirectory scratch;
     codesign::FileCodeSigningService service{
-        codesign::CodeAccess{std::make_shared<foundation::Places>(), sampleExecutable}};
+        codesign::CodeAccess{std::make_shared<base::Places>(), sampleExecutable}};
 };
 
 }  // namespace pinwell::test

@@ -71,7 +71,7 @@ TEST_F(StaticCodeOfAPath, OfAnUnsignedBundleIsFoundAndSaysNothing) {
 }
 
 TEST_F(StaticCodeOfAPath, IsAnyOtherFileWithoutASignature) {
-    EXPECT_EQ(askAbout(foundation::toData("some text")).validity, kUnsigned);
+    EXPECT_EQ(askAbout(base::toData("some text")).validity, kUnsigned);
     EXPECT_EQ(askAbout({}).validity, kUnsigned);
 }
 
@@ -85,7 +85,7 @@ TEST_F(StaticCodeOfAPath, IsNothingInADirectoryWithoutMainExecutable) {
     std::filesystem::create_directory(scratch / "Sample.app");
     EXPECT_EQ(ask(scratch / "Sample.app").created, kStaticCodeNotFound);
     codesign::FileCodeSigningService blind(
-        {std::make_shared<foundation::Places>(), [](auto&, const std::string&) { return std::nullopt; }});
+        {std::make_shared<base::Places>(), [](auto&, const std::string&) { return std::nullopt; }});
     EXPECT_EQ(statusOf(blind.staticCode(scratch.url("Sample.app"), 0)), kStaticCodeNotFound);
 }
 
@@ -131,9 +131,9 @@ TEST_F(StaticCodeOfAPath, IsAboutTheFileThatWasFound) {
 TEST_F(StaticCodeOfAPath, NeedsGoodParameters) {
     writeFile(scratch / "image", imageNamed("a"));
     EXPECT_EQ(statusOf(service.staticCode(scratch.url("image"), 1)), kParameterError);
-    EXPECT_EQ(statusOf(service.staticCode(*foundation::URL::fromString("https://a.example/b"), 0)),
+    EXPECT_EQ(statusOf(service.staticCode(*values::URL::fromString("https://a.example/b"), 0)),
               kParameterError);
-    EXPECT_EQ(statusOf(service.staticCode(foundation::URL::fileURLWithPath(""), 0)), kParameterError);
+    EXPECT_EQ(statusOf(service.staticCode(values::URL::fileURLWithPath(""), 0)), kParameterError);
     const std::shared_ptr<codesign::StaticCode> code = codeAt("image");
     EXPECT_EQ(statusOf(service.checkValidity(*code, codesign::kDoNotValidateExecutable)), kUnimplemented);
     EXPECT_EQ(statusOf(service.checkValidity(*code, 0)), kUnimplemented);
@@ -160,7 +160,7 @@ TEST_F(StaticCodeOfAPath, LeavesTheTeamToTheSigningSet) {
 
 class SeparateSignature : public CodeSigningTest {
   protected:
-    static inline const Data kScript = foundation::toData("#!/bin/sh\n");
+    static inline const Data kScript = base::toData("#!/bin/sh\n");
 
     Answer askAboutBundle(const BundleBuilder& bundle) {
         bundle.write(scratch / "Sample.app");
@@ -175,7 +175,7 @@ TEST_F(SeparateSignature, IsInFilesOfTheBundle) {
         BundleBuilder().executable(kScript).separateSignature(codeDirectory, emptyRequirements(), cms));
     EXPECT_EQ(answer.validity, kSuccess);
     EXPECT_EQ(answer.information.unique, codeHashOf(2, codeDirectory));
-    EXPECT_EQ(answer.information.secureTimestamp, foundation::Date{1795204500});
+    EXPECT_EQ(answer.information.secureTimestamp, values::Date{1795204500});
 }
 
 TEST_F(SeparateSignature, MayBeAdHoc) {
@@ -203,7 +203,7 @@ TEST_F(SeparateSignature, RefusesOtherRequirements) {
 
 TEST_F(SeparateSignature, RefusesAnotherDirectorysCms) {
     const Data codeDirectory = CodeDirectoryBuilder().flags(0).build();
-    const Data cms = CmsBuilder(foundation::toData("another")).build();
+    const Data cms = CmsBuilder(base::toData("another")).build();
     EXPECT_EQ(askAboutBundle(BundleBuilder().executable(kScript).separateSignature(codeDirectory, {}, cms))
                   .validity,
               kInvalidSignature);

@@ -147,15 +147,15 @@ TEST_F(StaticValidity, RefusesMoreThanSixCodeDirectories) {
 class CoveredComponent : public StaticValidity, public ::testing::WithParamInterface<std::uint32_t> {};
 
 TEST_P(CoveredComponent, MustHaveTheDigestThatIsDemanded) {
-    const Data component = makeBlob(0xFADE7171, foundation::toData("rights"));
-    const Data other = makeBlob(0xFADE7171, foundation::toData("wrongs"));
+    const Data component = makeBlob(0xFADE7171, base::toData("rights"));
+    const Data other = makeBlob(0xFADE7171, base::toData("wrongs"));
     const Data directory = CodeDirectoryBuilder().covers(GetParam(), component).build();
     EXPECT_EQ(validityOf(SuperBlobBuilder().blob(0, directory).blob(GetParam(), component)), kSuccess);
     EXPECT_EQ(validityOf(SuperBlobBuilder().blob(0, directory).blob(GetParam(), other)), kInvalidSignature);
 }
 
 TEST_P(CoveredComponent, MustHaveTheDigestOfEveryDirectory) {
-    const Data component = makeBlob(0xFADE7171, foundation::toData("rights"));
+    const Data component = makeBlob(0xFADE7171, base::toData("rights"));
     const Data good = CodeDirectoryBuilder().covers(GetParam(), component).build();
     const Data bad =
         CodeDirectoryBuilder().digestType(1).specialSlot(GetParam(), Data(20, std::byte{1})).build();
@@ -164,7 +164,7 @@ TEST_P(CoveredComponent, MustHaveTheDigestOfEveryDirectory) {
 }
 
 TEST_P(CoveredComponent, IsNotCoveredByAZeroDigestOrAMissingSlot) {
-    const Data component = makeBlob(0xFADE7171, foundation::toData("rights"));
+    const Data component = makeBlob(0xFADE7171, base::toData("rights"));
     const Data zero = CodeDirectoryBuilder().specialSlot(GetParam(), Data(32)).build();
     EXPECT_EQ(validityOf(SuperBlobBuilder().blob(0, zero).blob(GetParam(), component)), kSuccess);
     EXPECT_EQ(validityOf(SuperBlobBuilder().blob(0, directoryOf(2)).blob(GetParam(), component)), kSuccess);
@@ -206,7 +206,7 @@ TEST_F(StaticValidity, OfASignersSignature) {
     EXPECT_EQ(answer.information.flags, 0U);
     EXPECT_EQ(answer.information.teamIdentifier, "TEAM123456");
     ASSERT_TRUE(answer.information.secureTimestamp);
-    EXPECT_EQ(foundation::toString(*answer.information.secureTimestamp), "2026-11-20 19:55:00 +0000");
+    EXPECT_EQ(values::describe(*answer.information.secureTimestamp), "2026-11-20 19:55:00 +0000");
 }
 
 TEST_F(StaticValidity, AcceptsACmsMessageInBer) {
@@ -278,17 +278,17 @@ TEST_F(DiskImageValidity, TakesPrecedenceOverTheBeginningOfTheFile) {
 
 TEST_F(DiskImageValidity, IsUnsignedWithOneZeroField) {
     Data file(100);
-    foundation::append(file, DiskImageBuilder().codeSignOffset(50).codeSignLength(0).trailer());
+    base::append(file, DiskImageBuilder().codeSignOffset(50).codeSignLength(0).trailer());
     EXPECT_EQ(askAbout(file).validity, kUnsigned);
     file.resize(100);
-    foundation::append(file, DiskImageBuilder().codeSignOffset(0).codeSignLength(50).trailer());
+    base::append(file, DiskImageBuilder().codeSignOffset(0).codeSignLength(50).trailer());
     EXPECT_EQ(askAbout(file).validity, kUnsigned);
 }
 
 TEST_F(DiskImageValidity, RefusesASignatureThatReachesIntoTheTrailer) {
     const auto validity = [this](std::uint64_t offset, std::uint64_t length) {
         Data file(100);
-        foundation::append(file, DiskImageBuilder().codeSignOffset(offset).codeSignLength(length).trailer());
+        base::append(file, DiskImageBuilder().codeSignOffset(offset).codeSignLength(length).trailer());
         return askAbout(file).validity;
     };
     EXPECT_EQ(validity(50, 51), kInvalidSignature);

@@ -4,9 +4,8 @@
 
 #include <filesystem>
 
+#include "base/byte_io.h"
 #include "codesign/code_error.h"
-#include "foundation/byte_reader.h"
-#include "foundation/byte_writer.h"
 #include "support/code_directory_builder.h"
 #include "support/resident_memory.h"
 #include "support/temporary_directory.h"
@@ -14,12 +13,12 @@
 namespace pinwell::test {
 namespace {
 
+using base::ShortRead;
 using codesign::CodeError;
 using codesign::FileSource;
 using codesign::MemorySource;
 using codesign::parseSuperBlob;
 using codesign::readSuperBlob;
-using foundation::ShortRead;
 
 /// Three blobs, in the slots 0, 2 and 7.
 SuperBlobBuilder threeBlobs() {
@@ -36,7 +35,7 @@ TEST(SuperBlob, GivesItsBlobsInIndexOrder) {
     EXPECT_EQ(blobs[0].slot, 0U);
     EXPECT_EQ(blobs[1].slot, 2U);
     EXPECT_EQ(blobs[1].magic, 0xA2U);
-    EXPECT_EQ(foundation::toData(blobs[1].bytes), makeBlob(0xA2, Data(4, std::byte{2})));
+    EXPECT_EQ(base::toData(blobs[1].bytes), makeBlob(0xA2, Data(4, std::byte{2})));
     EXPECT_EQ(blobs[2].slot, 7U);
 }
 
@@ -110,12 +109,12 @@ TEST(SuperBlob, RefusesABlobWhoseHeaderIsCut) {
 }
 
 TEST(SuperBlob, RefusesABlobShorterThanItsHeader) {
-    const Data blob = foundation::ByteWriter().be32(0xA0).be32(7).data();
+    const Data blob = base::ByteWriter().be32(0xA0).be32(7).data();
     EXPECT_THROW(parseSuperBlob(SuperBlobBuilder().blob(0, blob).build()), CodeError);
 }
 
 TEST(SuperBlob, RefusesABlobLongerThanTheSuperBlob) {
-    const Data blob = foundation::ByteWriter().be32(0xA0).be32(9).data();
+    const Data blob = base::ByteWriter().be32(0xA0).be32(9).data();
     EXPECT_THROW(parseSuperBlob(SuperBlobBuilder().blob(0, blob).build()), ShortRead);
 }
 
@@ -160,7 +159,7 @@ TEST(SuperBlob, EndsCleanlyWhereverItIsCut) {
 TEST(SuperBlobInAFile, IsReadWithoutThePaddingOfItsArea) {
     const Data superblob = threeBlobs().build();
     Data file(100);
-    foundation::append(file, superblob);
+    base::append(file, superblob);
     file.resize(file.size() + 500, std::byte{0xFF});
     EXPECT_EQ(readSuperBlob(MemorySource(file), 100, superblob.size() + 500), superblob);
 }
@@ -182,9 +181,9 @@ TEST(SuperBlobInAFile, TakesMemoryForExistingBytesWhateverItsLength) {
     const std::string path = directory / "signed";
     writeFile(path, ByteView(threeBlobs().length(0xFFFFFFFF).build()));
     std::filesystem::resize_file(path, 0xFFFFFFFF);
-    const FileSource source(foundation::Places(), path);
+    const FileSource source(base::Places(), path);
     const std::size_t before = residentMemory();
-    const foundation::SharedBytes superblob = readSuperBlob(source, 0, source.size());
+    const base::SharedBytes superblob = readSuperBlob(source, 0, source.size());
     EXPECT_EQ(superblob.size(), 0xFFFFFFFF);
     EXPECT_EQ(parseSuperBlob(superblob).size(), 3U);
     EXPECT_LE(residentMemory(), before + kLittleMemory);

@@ -99,8 +99,8 @@ TEST(TimeOfAToken, IsInUtcToTheSecond) {
     const auto timeOf = [](const std::string& text) {
         return secureTimestamp(CmsBuilder(kContent).timestamp(TimestampBuilder().time(text)).build());
     };
-    EXPECT_EQ(timeOf("20261120195500Z"), foundation::Date{1795204500});
-    EXPECT_EQ(timeOf("20240229235959.999999Z"), foundation::Date{1709251199});
+    EXPECT_EQ(timeOf("20261120195500Z"), values::Date{1795204500});
+    EXPECT_EQ(timeOf("20240229235959.999999Z"), values::Date{1709251199});
     for (const auto* const wrong :
          {"20261120195500", "20261120195500+0100", "202611201955Z", "2026112019Z", "20261120195500.Z",
           "20261120195500,5Z", "20261120195560Z", "20261120196000Z", "20261120240000Z", "20261131000000Z",

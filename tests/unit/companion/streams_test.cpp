@@ -88,7 +88,7 @@ TEST_F(PathLists, DoNotWaitForAPipe) {
     ASSERT_TRUE(list);
     EXPECT_EQ(list->next().state, State::wait);
     {
-        const foundation::FileDescriptor writer(::open(file.c_str(), O_WRONLY | O_CLOEXEC));
+        const base::FileDescriptor writer(::open(file.c_str(), O_WRONLY | O_CLOEXEC));
         ASSERT_TRUE(writer);
         ASSERT_EQ(::write(writer.get(), "a\nb", 3), 3);
         const auto first = list->next();

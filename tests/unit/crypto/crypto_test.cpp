@@ -1,4 +1,5 @@
 #include "crypto/crypto.h"
+#include "base/text.h"
 
 #include <gtest/gtest.h>
 
@@ -8,8 +9,8 @@
 namespace pinwell::crypto {
 namespace {
 
-using foundation::asBytes;
-using foundation::toHex;
+using base::asBytes;
+using base::toHex;
 
 /// The digest of "abc", as FIPS 180-4 and RFC 1321 give it.
 struct Known {

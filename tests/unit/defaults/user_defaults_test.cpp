@@ -12,9 +12,9 @@
 namespace pinwell::defaults {
 namespace {
 
-using foundation::Dictionary;
 using test::ScopedVariable;
 using test::TemporaryDirectory;
+using values::Dictionary;
 
 constexpr std::string_view kDomain = "com.example.tool";
 

@@ -11,16 +11,16 @@
 
 #include "files/file_manager.h"
 #include "fixture.h"
-#include "foundation/url.h"
 #include "support/fake_file_manager.h"
 #include "support/volume.h"
+#include "values/url.h"
 
 namespace pinwell::test {
 namespace {
 
+using base::asBytes;
 using files::FileManager;
 using files::URL;
-using foundation::asBytes;
 using testing::AnyOf;
 using testing::ElementsAre;
 using testing::IsSubsetOf;
@@ -64,9 +64,9 @@ class FailingCalls : public FilesTest {
     using Attempt = std::function<std::optional<std::int64_t>()>;
 
     template <class T>
-    static std::optional<std::int64_t> outcome(const foundation::Result<T>& result) {
+    static std::optional<std::int64_t> outcome(const base::Result<T>& result) {
         if (result) return std::nullopt;
-        EXPECT_FALSE(result.error().userInfo().empty()) << "the error names no path";
+        EXPECT_FALSE(result.error().path().empty()) << "the error names no path";
         return result.error().code();
     }
 
@@ -148,7 +148,7 @@ TEST_F(FailingCalls, InACopyLeaveAWholeCopyOrNone) {
 TEST_F(FailingCalls, InACopyByHandNameTheFileThatTheyConcern) {
     for (const auto& [call, name] : {std::pair{"pread", "original"}, {"pwrite", "copy"}}) {
         prepareFiles();
-        foundation::Result<void> done;
+        base::Result<void> done;
         {
             std::set<std::string> failing = kCopiesOfTheKernel;
             failing.insert(call);
@@ -259,7 +259,7 @@ TEST_F(FailingCalls, OrNotANewFileIsFlushedAndThenItsDirectory) {
     const URL original = url("folder/original");
     struct Row {
         const char* way;
-        std::function<foundation::Result<void>(const URL&)> make;
+        std::function<base::Result<void>(const URL&)> make;
     };
     const std::vector<Row> rows{
         {"written plainly",
@@ -423,7 +423,7 @@ void doAll(FileManager& manager, const TemporaryDirectory& directory) {
         EXPECT_EQ((*handle)->seekToEnd(), contents.size());
         (*handle)->write(asBytes("more"));
         (*handle)->seek(0);
-        EXPECT_EQ(foundation::toString((*handle)->read(6000)), contents + "more");
+        EXPECT_EQ(base::toString((*handle)->read(6000)), contents + "more");
         (*handle)->truncate(4000);
         (*handle)->synchronize();
         (*handle)->close();
@@ -431,7 +431,7 @@ void doAll(FileManager& manager, const TemporaryDirectory& directory) {
     ASSERT_THAT(manager.replaceItem(file, copy), Succeeds());
     const auto read = manager.contentsOfFile(file);
     ASSERT_THAT(read, Succeeds());
-    EXPECT_EQ(foundation::toString(*read), contents.substr(0, 4000));
+    EXPECT_EQ(base::toString(*read), contents.substr(0, 4000));
     ASSERT_THAT(manager.removeItem(file), Succeeds());
 }
 

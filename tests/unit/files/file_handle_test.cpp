@@ -5,17 +5,17 @@
 #include <limits>
 
 #include "fixture.h"
-#include "foundation/url.h"
 #include "support/file_size_limit.h"
 #include "support/volume.h"
+#include "values/url.h"
 
 namespace pinwell::test {
 namespace {
 
+using base::asBytes;
+using base::toString;
 using files::FileHandle;
 using files::FileHandleError;
-using foundation::asBytes;
-using foundation::toString;
 using testing::EndsWith;
 using testing::HasSubstr;
 using testing::StartsWith;

@@ -6,16 +6,16 @@
 
 #include <limits>
 
+#include "base/handle.h"
 #include "fixture.h"
-#include "foundation/file_io.h"
 
 namespace pinwell::test {
 namespace {
 
+using base::FileDescriptor;
+using base::toString;
 using files::FileHandleError;
 using files::FileReader;
-using foundation::FileDescriptor;
-using foundation::toString;
 
 class Reader : public FilesTest {
   protected:

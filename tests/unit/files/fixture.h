@@ -64,7 +64,7 @@ MATCHER_P2(FailsWith, reason, path, "fails with errno " + testing::PrintToString
         return false;
     }
     *result_listener << "failed with " << arg.error().localizedDescription();
-    return arg.error().domain() == foundation::kPOSIXErrorDomain && arg.error().code() == reason &&
+    return arg.error().domain() == base::kPOSIXErrorDomain && arg.error().code() == reason &&
            arg.error().localizedDescription().starts_with(std::string(path) + ": ");
 }
 

@@ -10,10 +10,10 @@
 #include <filesystem>
 #include <future>
 
+#include "base/handle.h"
 #include "fixture.h"
-#include "foundation/file_io.h"
-#include "foundation/url.h"
 #include "support/volume.h"
+#include "values/url.h"
 
 namespace pinwell::test {
 namespace {
@@ -28,11 +28,11 @@ class Lock : public FilesTest {
     static void silent() {}
 
     bool isLocked(std::string_view name) const {
-        const foundation::FileDescriptor file(open(path(name).c_str(), O_RDONLY | O_CLOEXEC));
+        const base::FileDescriptor file(open(path(name).c_str(), O_RDONLY | O_CLOEXEC));
         return flock(file.get(), LOCK_EX | LOCK_NB) != 0 && errno == EWOULDBLOCK;
     }
 
-    foundation::Places places;
+    base::Places places;
 };
 
 TEST_F(Lock, HoldsUntilItDies) {
@@ -81,7 +81,7 @@ TEST_F(Lock, IsTakenWhenTheOtherIsReleased) {
     auto first = lockPath(places, path("file"), 0ms, silent);
     ASSERT_THAT(first, Succeeds());
     auto second = std::async(std::launch::async, [&] { return manager->lockItem(url("file"), silent); });
-    first = foundation::Error::posix(ECANCELED);
+    first = base::Error::posix(ECANCELED);
     ASSERT_THAT(second.get(), Succeeds());
 }
 
@@ -91,7 +91,7 @@ TEST_F(Lock, IsOnTheFileThatThePathNamesAfterwards) {
     auto second = std::async(std::launch::async, [&] { return manager->lockItem(url("file"), silent); });
     writeFile(path("other"), "new");
     std::filesystem::rename(path("other"), path("file"));
-    first = foundation::Error::posix(ECANCELED);
+    first = base::Error::posix(ECANCELED);
     const auto lock = second.get();
     ASSERT_THAT(lock, Succeeds());
     EXPECT_TRUE(isLocked("file"));

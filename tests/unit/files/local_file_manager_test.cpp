@@ -2,7 +2,7 @@
 #include <cstdlib>
 
 #include "fixture.h"
-#include "foundation/value.h"
+#include "values/value.h"
 
 namespace pinwell::test {
 namespace {

@@ -6,8 +6,8 @@
 namespace pinwell::test {
 namespace {
 
+using base::asBytes;
 using files::FileManager;
-using foundation::asBytes;
 using testing::ElementsAre;
 using testing::IsEmpty;
 

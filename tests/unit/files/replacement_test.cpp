@@ -203,7 +203,7 @@ TEST_F(Replacement, OfACloneOnAVolumeThatClones) {
         const auto handle = manager->openForUpdating(copy);
         ASSERT_THAT(handle, Succeeds());
         (*handle)->seekToEnd();
-        (*handle)->write(foundation::asBytes("more"));
+        (*handle)->write(base::asBytes("more"));
     }
     EXPECT_EQ(readFile(volume / "original"), contents);
     ASSERT_THAT(manager->replaceItem(original, copy), Succeeds());

@@ -4,8 +4,8 @@
 #include <filesystem>
 
 #include "fixture.h"
-#include "foundation/value.h"
 #include "support/volume.h"
+#include "values/value.h"
 
 #if defined(__has_feature)
 #if __has_feature(address_sanitizer)
@@ -150,7 +150,7 @@ TEST_F(Trash, RefusesAMissingItem) {
 TEST_F(Trash, RefusesAVolumeThatHasNone) {
     const auto place = manager->trashItem(URL::fileURLWithPath("/proc/self/status"));
     EXPECT_THAT(place, FailsWith(EOPNOTSUPP, "/proc/self/status"));
-    const auto* beneath = place.error().userInfo().at(std::string(foundation::kUnderlyingErrorKey)).error();
+    const auto* beneath = place.error().underlying();
     ASSERT_NE(beneath, nullptr);
     EXPECT_FALSE(beneath->localizedFailureReason().empty());
 }

@@ -1,13 +1,13 @@
 #include <unistd.h>
 
 #include "fixture.h"
-#include "foundation/url.h"
+#include "values/url.h"
 
 namespace pinwell::test {
 namespace {
 
+using base::asBytes;
 using files::FileManager;
-using foundation::asBytes;
 using testing::ElementsAre;
 
 using WholeFile = FilesTest;
@@ -17,7 +17,7 @@ TEST_F(WholeFile, IsReadByteForByte) {
     writeFile(path("file"), contents);
     const auto read = manager->contentsOfFile(url("file"));
     ASSERT_THAT(read, Succeeds());
-    EXPECT_EQ(foundation::toString(*read), contents);
+    EXPECT_EQ(base::toString(*read), contents);
 }
 
 TEST_F(WholeFile, MayBeEmpty) {
@@ -38,7 +38,7 @@ TEST_F(WholeFile, MayBeAsLongAsTheLimitAndNoLonger) {
 }
 
 TEST_F(WholeFile, ThatClaimsNoLengthIsReadToItsEnd) {
-    const auto read = manager->contentsOfFile(foundation::URL::fileURLWithPath("/proc/self/status"));
+    const auto read = manager->contentsOfFile(values::URL::fileURLWithPath("/proc/self/status"));
     ASSERT_THAT(read, Succeeds());
     EXPECT_FALSE(read->empty());
 }
@@ -54,7 +54,7 @@ TEST_F(WholeFile, IsNoLinkDirectoryOrFIFO) {
 }
 
 TEST_F(WholeFile, IsNoDevice) {
-    const auto read = manager->contentsOfFile(foundation::URL::fileURLWithPath("/dev/zero"));
+    const auto read = manager->contentsOfFile(values::URL::fileURLWithPath("/dev/zero"));
     EXPECT_THAT(read, FailsWith(EINVAL, "/dev/zero"));
 }
 

@@ -5,15 +5,16 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::Data;
+using base::Data;
 
 CodeHash codeHash(std::uint32_t algorithm, int fill) {
     return {algorithm, Data(algorithm == 4 ? 48 : 20, static_cast<std::byte>(fill))};
 }
 
 TEST(ListableHashes, BeginsWithTheOwnHashAndRepeatsNothing) {
-    EXPECT_EQ(listableHashes(codeHash(2, 1), {codeHash(4, 2), codeHash(2, 1), codeHash(4, 2), codeHash(1, 1)}),
-              (std::vector<CodeHash>{codeHash(2, 1), codeHash(4, 2), codeHash(1, 1)}));
+    EXPECT_EQ(
+        listableHashes(codeHash(2, 1), {codeHash(4, 2), codeHash(2, 1), codeHash(4, 2), codeHash(1, 1)}),
+        (std::vector<CodeHash>{codeHash(2, 1), codeHash(4, 2), codeHash(1, 1)}));
 }
 
 TEST(ListableHashes, SkipsHashesThatATicketCannotList) {

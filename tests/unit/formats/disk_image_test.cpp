@@ -14,7 +14,7 @@
 namespace pinwell {
 namespace {
 
-using foundation::Data;
+using base::Data;
 using test::DiskImageBuilder;
 
 UDIFFileHeader headerOf(const DiskImageBuilder& builder) {
@@ -84,7 +84,7 @@ TEST(DiskImageSignature, IsReadInThreeSteps) {
     EXPECT_EQ(signature.fault, std::nullopt);
     const BlobRecord* const blob = ticketBlobOf(signature.blobs);
     ASSERT_NE(blob, nullptr);
-    EXPECT_EQ(foundation::toString(ticketIn(*blob)), "ticket");
+    EXPECT_EQ(base::toString(ticketIn(*blob)), "ticket");
     EXPECT_EQ(explainTicketPlace(signature), std::nullopt);
     ASSERT_EQ(lines.size(), 3U);
     EXPECT_TRUE(lines[0].starts_with("Codesign offset 0x3e8 length: "));

@@ -36,9 +36,9 @@ namespace {
 
 namespace status = satchel_status;
 
-using foundation::Data;
-using foundation::Dictionary;
-using foundation::Value;
+using base::Data;
+using values::Dictionary;
+using values::Value;
 
 constexpr std::size_t kEntries = 1000;
 constexpr std::size_t kPayloadSize = kTicketHeaderSize + kEntries * 20;

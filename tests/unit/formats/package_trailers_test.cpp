@@ -4,8 +4,8 @@
 
 #include <vector>
 
+#include "base/bytes.h"
 #include "formats/explain_ticket.h"
-#include "foundation/bytes.h"
 #include "support/collected_diagnostics.h"
 #include "support/memory_reader.h"
 #include "support/package_builder.h"
@@ -13,7 +13,7 @@
 namespace pinwell {
 namespace {
 
-using foundation::Data;
+using base::Data;
 using test::CollectedDiagnostics;
 using test::makeTrailer;
 using test::TrailerFields;
@@ -170,7 +170,7 @@ struct Surveyed {
 };
 
 Surveyed surveyOf(const std::string& package) {
-    test::MemoryReader file(foundation::toData(foundation::asBytes(package)));
+    test::MemoryReader file(base::toData(base::asBytes(package)));
     Surveyed found;
     found.survey = surveyPackageTrailers(
         file, [&](const surveyed_trailer& trailer) { found.trailers.push_back(trailer); });
@@ -178,7 +178,7 @@ Surveyed surveyOf(const std::string& package) {
 }
 
 package_trailers walkOf(const std::string& package) {
-    test::MemoryReader file(foundation::toData(foundation::asBytes(package)));
+    test::MemoryReader file(base::toData(base::asBytes(package)));
     return walkPackageTrailers(file, "Sample.pkg");
 }
 
@@ -251,13 +251,13 @@ TEST(PackageTrailerSurvey, EndsAtARecordWhoseDataWouldBeginBeforeTheFile) {
 
 TEST(PackageTrailerSurvey, ThrowsIfARecordCannotBeRead) {
     const std::string package = PackageBuilder().terminator().ticket("ticket").build();
-    test::MemoryReader file(foundation::toData(foundation::asBytes(package)), package.size() - 1);
+    test::MemoryReader file(base::toData(base::asBytes(package)), package.size() - 1);
     EXPECT_THROW(surveyPackageTrailers(file, [](const surveyed_trailer&) {}), files::FileHandleError);
 }
 
 TEST(PackageTrailerWalk, TurnsAReadErrorIntoAFaultAndADiagnosticLine) {
     const std::string package = PackageBuilder().terminator().ticket("ticket").build();
-    test::MemoryReader file(foundation::toData(foundation::asBytes(package)), package.size() - 1);
+    test::MemoryReader file(base::toData(base::asBytes(package)), package.size() - 1);
     CollectedDiagnostics said;
     const package_trailers walked = walkPackageTrailers(file, "Sample.pkg", {}, said.diagnostics());
     EXPECT_EQ(walked.ticket, std::nullopt);
@@ -267,13 +267,13 @@ TEST(PackageTrailerWalk, TurnsAReadErrorIntoAFaultAndADiagnosticLine) {
 
 TEST(PackageTrailerWalk, StatesEachStepInOrder) {
     test::MemoryReader file(
-        foundation::toData(foundation::asBytes(PackageBuilder().terminator().ticket("ticket").build())));
+        base::toData(base::asBytes(PackageBuilder().terminator().ticket("ticket").build())));
     CollectedDiagnostics said;
     const package_trailers walked = walkPackageTrailers(file, "Sample.pkg", {}, said.diagnostics());
     EXPECT_EQ(said.lines(),
               (std::vector<std::string>{
                   "Terminator Trailer size must be 0, not 6", "{magic: t8lr, version: 1, type: 2, length: 6}",
-                  foundation::format("Found expected ticket at %llu with length of 6", walked.ticketStart)}));
+                  values::format("Found expected ticket at %llu with length of 6", walked.ticketStart)}));
 }
 
 TEST(TicketPlace, OfAPackageIsAtFaultIfTheWalkEndedWithAFault) {

@@ -3,15 +3,15 @@
 #include <limits>
 #include <span>
 
+#include "base/bytes.h"
 #include "formats/satchel.h"
-#include "foundation/bytes.h"
 #include "support/ticket_builder.h"
 
 namespace pinwell {
 namespace {
 
-using foundation::Data;
-using foundation::toData;
+using base::Data;
+using base::toData;
 using test::derElementOfSize;
 using test::SatchelBuilder;
 

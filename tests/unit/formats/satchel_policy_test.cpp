@@ -8,10 +8,10 @@ namespace {
 
 namespace status = satchel_status;
 
-using foundation::Array;
-using foundation::Dictionary;
-using foundation::Value;
 using test::FakeTrustService;
+using values::Array;
+using values::Dictionary;
+using values::Value;
 
 TEST(TicketPolicy, IsThePlatformSecurityLibrarysWhenThatHasOne) {
     FakeTrustService service;

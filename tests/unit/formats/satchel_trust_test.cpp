@@ -4,22 +4,21 @@
 #include <memory>
 #include <stdexcept>
 
+#include "base/bytes.h"
 #include "formats/satchel.h"
 #include "formats/tm_ticket.h"
-#include "foundation/bytes.h"
-#include "foundation/date.h"
 #include "support/temporary_directory.h"
 #include "support/ticket_builder.h"
 #include "trust/trust.h"
+#include "values/date.h"
 
 namespace pinwell {
 namespace {
 
 namespace status = satchel_status;
 
-using foundation::ByteView;
-using foundation::Data;
-using foundation::Date;
+using base::ByteView;
+using base::Data;
 using test::hashOf;
 using test::IssuedChain;
 using test::KeyKind;
@@ -27,6 +26,7 @@ using test::SatchelBuilder;
 using test::SigningKey;
 using test::TicketChain;
 using test::TicketPayloadBuilder;
+using values::Date;
 
 constexpr Date kNow{1795000000};            // 2026-11-18
 constexpr Date kAfterEveryone{2840140800};  // 2060-01-01
@@ -43,7 +43,7 @@ class SatchelTrust : public testing::Test {
     trust::Status verify(const Data& container) {
         if (service_ == nullptr) {
             service_ = trust::makeTrustService(
-                foundation::PlatformDirectory(platform_.path()),
+                config::PlatformDirectory(platform_.path()),
                 [](std::string_view line) { ADD_FAILURE() << "logged: " << line; }, [this] { return now; });
         }
         satchel_view view;

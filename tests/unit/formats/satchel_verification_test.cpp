@@ -5,9 +5,9 @@
 
 #include <new>
 
+#include "base/bytes.h"
 #include "formats/satchel.h"
 #include "formats/tm_ticket.h"
-#include "foundation/bytes.h"
 #include "support/fake_trust_service.h"
 #include "support/ticket_builder.h"
 
@@ -16,10 +16,10 @@ namespace {
 
 namespace status = satchel_status;
 
-using foundation::ByteView;
-using foundation::Data;
-using foundation::Error;
-using foundation::toData;
+using base::ByteView;
+using base::Data;
+using base::Error;
+using base::toData;
 using test::derElement;
 using test::derElementOfSize;
 using test::FakeTrustService;
@@ -262,24 +262,24 @@ TEST_F(SatchelVerification, RefusesATrustObjectWithoutAPublicKey) {
 // The signature.
 
 TEST_F(SatchelVerification, PassesOnTheSignatureErrorsCodeWhenItIsAStatus) {
-    service.signatureError = Error(foundation::kOSStatusErrorDomain, kForeignStatus, "no");
+    service.signatureError = Error(base::kOSStatusErrorDomain, kForeignStatus, "no");
     EXPECT_EQ(verify(satchel()), kForeignStatus);
 }
 
 TEST_F(SatchelVerification, GivesAStatusOfItsOwnToASignatureErrorOfCode0) {
-    service.signatureError = Error(foundation::kOSStatusErrorDomain, 0, "no");
+    service.signatureError = Error(base::kOSStatusErrorDomain, 0, "no");
     EXPECT_EQ(verify(satchel()), status::kBadSignature);
 }
 
 TEST_F(SatchelVerification, GivesAStatusOfItsOwnToASignatureErrorOfAnotherDomain) {
-    service.signatureError = Error(foundation::kPOSIXErrorDomain, 5, "no");
+    service.signatureError = Error(base::kPOSIXErrorDomain, 5, "no");
     EXPECT_EQ(verify(satchel()), status::kBadSignature);
 }
 
 TEST_F(SatchelVerification, DoesNotMakeSuccessOfACodeThatIsTooLargeForAStatus) {
     for (const std::int64_t code :
          {std::int64_t{1} << 32U, -(std::int64_t{1} << 32U), std::int64_t{1} << 40U}) {
-        service.signatureError = Error(foundation::kOSStatusErrorDomain, code, "no");
+        service.signatureError = Error(base::kOSStatusErrorDomain, code, "no");
         EXPECT_EQ(verify(satchel()), status::kBadSignature) << code;
     }
 }

@@ -2,22 +2,22 @@
 
 #include <gtest/gtest.h>
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 #include "support/collected_diagnostics.h"
 #include "support/disk_image_builder.h"
 
 namespace pinwell {
 namespace {
 
-using foundation::ByteReader;
-using foundation::ByteView;
-using foundation::ByteWriter;
-using foundation::Data;
-using foundation::toData;
-using foundation::Value;
+using base::ByteReader;
+using base::ByteView;
+using base::ByteWriter;
+using base::Data;
+using base::toData;
 using test::CollectedDiagnostics;
 using test::makeBlob;
 using test::SuperBlobBuilder;
+using values::Value;
 using Lines = std::vector<std::string>;
 
 const Data kFields = ByteWriter().be32(0xFADE0CC0).be32(300).be32(2).data();
@@ -46,7 +46,7 @@ TEST(SuperblobLayout, NamesTheFieldWhereTheBytesEnd) {
     try {
         readSuperblobHeader(reader);
         FAIL() << "eleven bytes are no header";
-    } catch (const foundation::ShortRead& error) {
+    } catch (const base::ShortRead& error) {
         EXPECT_NE(std::string(error.what()).find("superblob count"), std::string::npos) << error.what();
     }
 }
@@ -79,22 +79,22 @@ TEST(BlobSet, HasARecordOfExactlyFiveKeysForEachBlobInIndexOrder) {
     ASSERT_TRUE(blobs.has_value());
     ASSERT_EQ(blobs->size(), 2U);
     const auto valuesOf = [](const BlobRecord& record) {
-        return foundation::Dictionary{{"cs slot type", record.at("cs slot type")},
-                                      {"offset", record.at("offset")},
-                                      {"length", record.at("length")},
-                                      {"data", record.at("data")},
-                                      {"magic", record.at("magic")}};
+        return values::Dictionary{{"cs slot type", record.at("cs slot type")},
+                                  {"offset", record.at("offset")},
+                                  {"length", record.at("length")},
+                                  {"data", record.at("data")},
+                                  {"magic", record.at("magic")}};
     };
-    EXPECT_EQ(valuesOf((*blobs)[0]), (foundation::Dictionary{{"cs slot type", Value(0U)},
-                                                             {"offset", Value(28U)},
-                                                             {"length", Value(20U)},
-                                                             {"data", Value(first())},
-                                                             {"magic", Value(0xFADE0C02U)}}));
-    EXPECT_EQ(valuesOf((*blobs)[1]), (foundation::Dictionary{{"cs slot type", Value(2U)},
-                                                             {"offset", Value(48U)},
-                                                             {"length", Value(12U)},
-                                                             {"data", Value(second())},
-                                                             {"magic", Value(0xFADE0C01U)}}));
+    EXPECT_EQ(valuesOf((*blobs)[0]), (values::Dictionary{{"cs slot type", Value(0U)},
+                                                         {"offset", Value(28U)},
+                                                         {"length", Value(20U)},
+                                                         {"data", Value(first())},
+                                                         {"magic", Value(0xFADE0C02U)}}));
+    EXPECT_EQ(valuesOf((*blobs)[1]), (values::Dictionary{{"cs slot type", Value(2U)},
+                                                         {"offset", Value(48U)},
+                                                         {"length", Value(12U)},
+                                                         {"data", Value(second())},
+                                                         {"magic", Value(0xFADE0C01U)}}));
     EXPECT_EQ((*blobs)[0].at("another key"), Value());
     EXPECT_EQ(lines, Lines{"Total Length: 60 Found blobs: 2"});
 }
@@ -216,7 +216,7 @@ class SuperblobWithTicket : public testing::Test {
         EXPECT_TRUE(blobs.has_value());
         CollectedDiagnostics said;
         Data result = toData(
-            superblobWithTicket(blobs.value_or(BlobSet{}), foundation::asBytes(ticket), 0, said.diagnostics())
+            superblobWithTicket(blobs.value_or(BlobSet{}), base::asBytes(ticket), 0, said.diagnostics())
                 .view());
         lines = said.lines();
         return result;
@@ -277,20 +277,20 @@ TEST_F(SuperblobWithTicket, HasRoomAfterItForTheCallersBytes) {
     ASSERT_TRUE(blobs.has_value());
     Data expected = twoBlobs().blob(0x10002, test::ticketBlob("ticket")).build();
     expected.resize(expected.size() + 512);
-    EXPECT_EQ(toData(superblobWithTicket(*blobs, foundation::asBytes("ticket"), 512).view()), expected);
+    EXPECT_EQ(toData(superblobWithTicket(*blobs, base::asBytes("ticket"), 512).view()), expected);
 }
 
 // Views of zeros that are never read.
 TEST_F(SuperblobWithTicket, IsNotMadeWhereItsLengthDoesNotFitIn32Bits) {
-    const foundation::SparseBuffer zeros(0xFFFFFFFF);
+    const base::SparseBuffer zeros(0xFFFFFFFF);
     const auto blobOf = [&](std::uint64_t length) {
         return BlobSet{{.slotType = 2, .offset = 20, .magic = 0, .data = zeros.view().first(length)}};
     };
     // Header 12, two entries of 8, the ticket's header 8 and its 6 bytes.
-    EXPECT_TRUE(hasRoomForTicket(blobOf(0xFFFFFFFF - 42), foundation::asBytes("ticket")));
-    EXPECT_FALSE(hasRoomForTicket(blobOf(0xFFFFFFFF - 41), foundation::asBytes("ticket")));
+    EXPECT_TRUE(hasRoomForTicket(blobOf(0xFFFFFFFF - 42), base::asBytes("ticket")));
+    EXPECT_FALSE(hasRoomForTicket(blobOf(0xFFFFFFFF - 41), base::asBytes("ticket")));
     EXPECT_TRUE(hasRoomForTicket({{.slotType = 0x10002, .offset = 20, .magic = 0, .data = zeros.view()}},
-                                 foundation::asBytes("ticket")));
+                                 base::asBytes("ticket")));
 }
 
 }  // namespace

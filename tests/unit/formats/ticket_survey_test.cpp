@@ -2,15 +2,15 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "base/bytes.h"
 #include "formats/satchel.h"
 #include "formats/tm_ticket.h"
-#include "foundation/bytes.h"
 #include "support/ticket_builder.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::Data;
+using base::Data;
 
 Data container() {
     return SatchelBuilder::of(TicketChain().issue(), TicketPayloadBuilder().entry(2, hashOf(1)).build())
@@ -41,10 +41,10 @@ TEST(SatchelSurvey, FindsThePartsInSpiteOfOneWrongLength) {
 
 TEST(SatchelSurvey, OfAContainerTooShortForItsPartsHasTheHeaderAlone) {
     const Data bytes = container();
-    const satchel_survey survey = satchel_survey_container(foundation::ByteView(bytes).first(87));
+    const satchel_survey survey = satchel_survey_container(base::ByteView(bytes).first(87));
     EXPECT_TRUE(survey.header);
     EXPECT_EQ(survey.view, satchel_view{});
-    const satchel_survey cut = satchel_survey_container(foundation::ByteView(bytes).first(15));
+    const satchel_survey cut = satchel_survey_container(base::ByteView(bytes).first(15));
     EXPECT_FALSE(cut.header);
     EXPECT_EQ(cut.fault->offset, 15U);
 }
@@ -53,13 +53,13 @@ TEST(CertificateBlockSurvey, EndsAtTheFirstElementThatBreaksARule) {
     const Data good = derElementOfSize(200);
     const auto surveyOf = [](const Data& block) { return satchel_survey_certificates(block); };
     Data contents = good;
-    foundation::append(contents, derElementOfSize(kSatchelMaximumCertificateSize + 1));
+    base::append(contents, derElementOfSize(kSatchelMaximumCertificateSize + 1));
     const Data tooLong = derElement(0x30, contents);
     EXPECT_EQ(surveyOf(tooLong).count, 1U);
     EXPECT_EQ(surveyOf(tooLong).fault->rule, std::string("a certificate is too long"));
 
     Data four;
-    for (int i = 0; i < 4; ++i) foundation::append(four, good);
+    for (int i = 0; i < 4; ++i) base::append(four, good);
     const satchel_certificate_block survey = surveyOf(derElement(0x30, four));
     EXPECT_EQ(survey.count, 3U);
     EXPECT_EQ(survey.status, satchel_status::kBadCertificates);
@@ -89,7 +89,7 @@ TEST(TicketSurvey, ReadsTheEntriesInSpiteOfOneWrongField) {
         tm_cdhash entry;
         ASSERT_EQ(tm_ticket_survey_copy_cdhash(survey, 1, &entry), 0);
         EXPECT_EQ(entry.algorithm, 1U);
-        EXPECT_EQ(foundation::toData(foundation::ByteView(entry.hash).first(entry.length)), hashOf(9));
+        EXPECT_EQ(base::toData(base::ByteView(entry.hash).first(entry.length)), hashOf(9));
         EXPECT_EQ(tm_ticket_survey_copy_cdhash(survey, 2, &entry), -1);
     }
 }

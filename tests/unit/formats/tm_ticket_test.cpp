@@ -5,15 +5,15 @@
 #include <limits>
 #include <span>
 
-#include "foundation/byte_writer.h"
-#include "foundation/bytes.h"
+#include "base/byte_io.h"
+#include "base/bytes.h"
 #include "support/ticket_builder.h"
 
 namespace pinwell {
 namespace {
 
-using foundation::ByteWriter;
-using foundation::Data;
+using base::ByteWriter;
+using base::Data;
 using test::hashOf;
 using test::TicketPayloadBuilder;
 

@@ -141,7 +141,7 @@ std::vector<verify::Check> checksOfTable(const std::string& files) {
                                  "style=\"sha1\"><offset>0</offset>"
                                  "<size>20</size></checksum>" +
                                  files + "</toc></xar>")
-                             .afterChecksum(foundation::toData("data"))
+                             .afterChecksum(base::toData("data"))
                              .build();
     verify::Workers workers(1);
     verify::Section section;

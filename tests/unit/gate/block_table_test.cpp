@@ -110,7 +110,7 @@ TEST(BlockTable, IsSkippedWhereItWouldUnpackToMoreThanTheLimit) {
 
 TEST(BlockTable, IsSkippedWhereThereIsNone) {
     Data image = Data(600);
-    const Data trailer = foundation::ByteWriter().text("koly").be32(4).zeros(504).data();
+    const Data trailer = base::ByteWriter().text("koly").be32(4).zeros(504).data();
     std::copy(trailer.begin(), trailer.end(), image.end() - 512);
     EXPECT_THAT(checksOf(image), isSkippedBecause("no list of its blocks"));
 }

@@ -6,8 +6,8 @@
 #include <fstream>
 #include <functional>
 
+#include "base/text.h"
 #include "codesign/byte_source.h"
-#include "foundation/base64.h"
 #include "gate_fixture.h"
 #include "lumora-local/samples.h"
 #include "support/code_directory_builder.h"
@@ -24,7 +24,7 @@ using verify::Section;
 using verify::VerifiedCode;
 using verify::Workers;
 
-constexpr foundation::Date kNow{1'795'204'500};
+constexpr values::Date kNow{1'795'204'500};
 
 /// Another bit in each of eight bytes, so that no field changes only in its sign or its parity.
 std::byte maskAt(std::size_t at) {
@@ -48,7 +48,7 @@ class EveryByte : public GateTest, public testing::WithParamInterface<std::size_
     std::vector<std::string> survivors(const std::string& artefact, const std::string& file,
                                        const Verification& verification = {}) const {
         EXPECT_EQ(exitStatusFor(artefact), 0);
-        Data bytes = foundation::toData(readFile(file));
+        Data bytes = base::toData(readFile(file));
         std::vector<std::string> found;
         for (std::size_t at = 0; at < bytes.size(); at += GetParam()) {
             bytes[at] ^= maskAt(at);
@@ -124,13 +124,13 @@ class EveryByteOfCode : public EveryByte {
 
     const std::string bundle = directory / "Sample.app";
     const std::string executable = bundle + "/Contents/Programs/Sample";
-    const Data text = foundation::toData("text\n");
-    const Data list = foundation::toData(
+    const Data text = base::toData("text\n");
+    const Data list = base::toData(
         "<plist version=\"1.0\"><dict><key>CFBundleExecutable</key><string>Sample</string></dict></plist>");
-    const Data seal = foundation::toData(
+    const Data seal = base::toData(
         "<plist version=\"1.0\"><dict><key>files2</key><dict><key>Resources/text"
         "</key><dict><key>hash2</key><data>" +
-        foundation::encodeBase64(codeDigest(2, text)) +
+        base::encodeBase64(codeDigest(2, text)) +
         "</data></dict></dict><key>rules2</key><dict/></dict></plist>");
 };
 

@@ -10,7 +10,7 @@
 #include <cstring>
 #include <filesystem>
 
-#include "foundation/file_io.h"
+#include "base/handle.h"
 #include "gate_fixture.h"
 #include "support/disk_image_builder.h"
 #include "support/executable_image_builder.h"
@@ -70,7 +70,7 @@ TEST_F(TreeOfArtefacts, IsNotLeftByLinksInIt) {
 TEST_F(TreeOfArtefacts, MayHoldSpecialFiles) {
     const std::string image = imageAt("z.dmg");
     ASSERT_EQ(mkfifo((tree + "/fifo.dmg").c_str(), 0600), 0);
-    const foundation::FileDescriptor socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    const base::FileDescriptor socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
     sockaddr_un address{};
     address.sun_family = AF_UNIX;
     const std::string path = tree + "/socket.dmg";

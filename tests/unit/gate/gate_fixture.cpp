@@ -44,7 +44,7 @@ void GateTest::staple(const std::string& path) const {
         for (const Data& hash : code.codeHashes) list(hash.size() == kHashLength ? kSha384 : 2, hash);
     const Data ticket = SatchelBuilder::of(chain, payload.build()).build();
     retrieval::ArtefactRun run(path, kOperationStaple, host_.services());
-    EXPECT_EQ(run.attach([&](const std::string&) { return foundation::Result<Data>(ticket); }).exitStatus, 0)
+    EXPECT_EQ(run.attach([&](const std::string&) { return base::Result<Data>(ticket); }).exitStatus, 0)
         << path;
 }
 

@@ -16,8 +16,8 @@
 
 namespace pinwell::test {
 
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteView;
+using base::Data;
 using gate::Result;
 
 class GateTest : public testing::Test {

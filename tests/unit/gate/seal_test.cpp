@@ -15,7 +15,7 @@ using verify::Seal;
 Seal sealWithRule(const std::string& value) {
     const std::string document = "<plist><dict><key>files2</key><dict/><key>rules2</key><dict><key>.</key>" +
                                  value + "</dict></dict></plist>";
-    return Seal::parse(foundation::asBytes(document));
+    return Seal::parse(base::asBytes(document));
 }
 
 TEST(Seal, TakesWeightsThatAreNumbers) {

@@ -3,6 +3,7 @@
 
 #include <filesystem>
 
+#include "base/text.h"
 #include "gate/run.h"
 #include "gate_fixture.h"
 #include "lumora-local/samples.h"
@@ -25,8 +26,7 @@ class FetchedTickets : public GateTest {
 
     /// Writes these bytes to the path of the image's ticket.
     void fetch(ByteView ticket) const {
-        writeFile(directory / ("tickets/2-2-" + foundation::toHex(stapledResult.codeHash) + ".ticket"),
-                  ticket);
+        writeFile(directory / ("tickets/2-2-" + base::toHex(stapledResult.codeHash) + ".ticket"), ticket);
     }
     Data ticketWith(const TicketPayloadBuilder& payload) const {
         return SatchelBuilder::of(chain, payload.build()).build();
@@ -70,13 +70,13 @@ TEST_F(FetchedTickets, AreRefusedIfTheyListAnother) {
 }
 
 TEST_F(FetchedTickets, AreRefusedIfTheyAreNoTickets) {
-    fetch(foundation::asBytes("no ticket"));
+    fetch(base::asBytes("no ticket"));
     expect(65, verify::kTicketGenuine, Outcome::failed);
 }
 
 TEST_F(FetchedTickets, AreRefusedIfTheyCannotBeRead) {
-    std::filesystem::create_directories(
-        directory / ("tickets/2-2-" + foundation::toHex(stapledResult.codeHash) + ".ticket"));
+    std::filesystem::create_directories(directory /
+                                        ("tickets/2-2-" + base::toHex(stapledResult.codeHash) + ".ticket"));
     expect(65, verify::kTicketCurrent, Outcome::failed);
 }
 

@@ -150,7 +150,7 @@ TEST_F(ClientIdentityTest, RefusesFilesThatHoldNone) {
         writeFile(certificate, std::string_view(text));
         EXPECT_THAT(fault(), HasSubstr("There is no certificate in " + certificate));
     }
-    writeFile(certificate, toPem("CERTIFICATE", foundation::toData("no certificate")));
+    writeFile(certificate, toPem("CERTIFICATE", base::toData("no certificate")));
     EXPECT_THAT(fault(), HasSubstr("Certificate number 1 in " + certificate + " cannot be read"));
 }
 

@@ -12,7 +12,7 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::FileDescriptor;
+using base::FileDescriptor;
 
 sockaddr_in loopback(std::uint16_t port) {
     sockaddr_in address{};

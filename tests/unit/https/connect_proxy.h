@@ -8,7 +8,7 @@
 #include <thread>
 #include <vector>
 
-#include "foundation/file_io.h"
+#include "base/handle.h"
 
 namespace pinwell::test {
 
@@ -33,8 +33,8 @@ class ConnectProxy {
     std::uint16_t targetPort_;
     int status_;
     std::uint16_t port_ = 0;
-    foundation::FileDescriptor listener_;
-    foundation::FileDescriptor stop_;
+    base::FileDescriptor listener_;
+    base::FileDescriptor stop_;
     mutable std::mutex mutex_;
     std::vector<std::string> heads_;
     std::thread thread_;  // last: it uses all of the above

@@ -20,7 +20,7 @@ TEST_F(DownloadTask, DeliversTheBodyInAPrivateFileThatIsGoneAfterwards) {
     server.enqueue(Script().respond({.body = "ticket"}));
     mode_t mode = 0;
     std::string path;
-    delegate.onDownload = [&](https::Task&, const foundation::URL& location) {
+    delegate.onDownload = [&](https::Task&, const values::URL& location) {
         struct stat status {};
         path = location.path();
         EXPECT_EQ(::lstat(path.c_str(), &status), 0);

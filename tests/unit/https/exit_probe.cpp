@@ -4,10 +4,10 @@
 #include <cstring>
 #include <memory>
 
-#include "foundation/run_loop.h"
-#include "foundation/url.h"
 #include "https/session.h"
+#include "runtime/queue.h"
 #include "support/fake_trust_service.h"
+#include "values/url.h"
 
 namespace {
 
@@ -25,10 +25,10 @@ class ExitingDelegate : public https::SessionDelegate {
         if (endsAtTheChallenge) std::exit(kDone);
         completion(https::Disposition::useCredential, https::Credential{challenge.serverTrust});
     }
-    void didFinishDownloading(https::Session&, https::Task&, const foundation::URL&) override {
+    void didFinishDownloading(https::Session&, https::Task&, const values::URL&) override {
         std::exit(kDone);
     }
-    void didComplete(https::Session&, https::Task&, const std::optional<foundation::Error>&) override {
+    void didComplete(https::Session&, https::Task&, const std::optional<base::Error>&) override {
         std::exit(kFailed);
     }
 };
@@ -39,7 +39,7 @@ int main(int argc, char** argv) {
     if (argc != 3) return 64;
     const std::string_view mode = argv[1];
     https::Request request;
-    request.url = foundation::URL::fromString(argv[2]);
+    request.url = values::URL::fromString(argv[2]);
 
     test::FakeTrustService trust;
     const auto service = https::makeSessionService(trust);
@@ -57,7 +57,7 @@ int main(int argc, char** argv) {
     });
     lookup->resume();
     if (mode == "several") first->dataTask(request, {})->resume();
-    foundation::RunLoop loop;
+    runtime::RunLoop loop;
     loop.run();
     return 1;
 }

@@ -309,7 +309,7 @@ TEST_F(HostileAnswer, IsWaitedForNearlyAMinuteAtEveryStep) {
 TEST_F(HostileAnswer, ControlCharactersOfTheServerStayOffTheTerminal) {
     const Outcome outcome = fetchFrom(Script().respond({.headers = {{"X-A", "\x1b[2Jx"}}}));
     ASSERT_TRUE(outcome.response);
-    const std::string text = foundation::Description<https::HTTPResponse>::of(*outcome.response);
+    const std::string text = values::Description<https::HTTPResponse>::of(*outcome.response);
     EXPECT_EQ(text.find('\x1b'), std::string::npos);
     EXPECT_THAT(text, HasSubstr("\\x1b[2Jx"));
 }

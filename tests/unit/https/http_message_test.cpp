@@ -37,20 +37,19 @@ TEST(Request, JoinsHeadersOfOneNameAndKeepsTheFirstSpelling) {
 }
 
 TEST(HTTPResponse, FindsHeadersWithoutRegardToCase) {
-    const https::HTTPResponse response{
-        *foundation::URL::fromString("https://a.example/"), 200, {{"X-Id", "1"}}};
+    const https::HTTPResponse response{*values::URL::fromString("https://a.example/"), 200, {{"X-Id", "1"}}};
     EXPECT_EQ(response.header("x-ID"), "1");
     EXPECT_FALSE(response.header("X-I"));
 }
 
 TEST(HTTPResponse, IsDescribedInOneLineWithItsHeadersSorted) {
-    const https::HTTPResponse response{*foundation::URL::fromString("https://a.example/p"),
+    const https::HTTPResponse response{*values::URL::fromString("https://a.example/p"),
                                        200,
                                        {{"b", "2\x1b\n"}, {"A-Type", "text/plain; x"}}};
-    EXPECT_EQ(foundation::Description<https::HTTPResponse>::of(response),
+    EXPECT_EQ(values::Description<https::HTTPResponse>::of(response),
               "{ URL: https://a.example/p } { Status Code: 200, Headers { A-Type = \"text/plain; x\"; "
               "b = \"2\\x1b\\n\"; } }");
-    EXPECT_EQ(foundation::Description<https::HTTPResponse>::of({response.url, 204, {}}),
+    EXPECT_EQ(values::Description<https::HTTPResponse>::of({response.url, 204, {}}),
               "{ URL: https://a.example/p } { Status Code: 204, Headers { } }");
 }
 

@@ -80,7 +80,7 @@ TEST_F(Proxy, PasswordDoesNotShowInTheError) {
     const Variable variable("https_proxy", proxy.url("http", "user:secret"));
     const Outcome outcome = fetch("https://lumora.example/");
     expectFailure(outcome, URLErrorCode::proxyFailed, "403");
-    EXPECT_THAT(foundation::describe(*outcome.error), Not(HasSubstr("secret")));
+    EXPECT_THAT(values::describe(*outcome.error), Not(HasSubstr("secret")));
 }
 
 TEST_F(Proxy, ThatCannotBeFoundIsAProxyFailure) {

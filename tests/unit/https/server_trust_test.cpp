@@ -99,7 +99,7 @@ TEST_F(ServerTrustChallenge, CountsOnlyTheFirstDecision) {
 }
 
 TEST_F(ServerTrustChallenge, RefusesCertificatesThatTheTrustServiceCannotRead) {
-    trust.parsesCertificate = [](foundation::ByteView) { return false; };
+    trust.parsesCertificate = [](base::ByteView) { return false; };
     expectFailure(fetch(server.url()), URLErrorCode::secureConnectionFailed, "could not be read");
     EXPECT_THAT(delegate.events, ElementsAre("completion"));
 }
@@ -124,7 +124,7 @@ TEST_F(ServerTrustChallenge, StartsFromAPolicyForThatHostAndThePlatformsAnchors)
     fetchFrom(Script().respond({}));
     ASSERT_EQ(trust.policies.size(), 1U);
     EXPECT_EQ(trust.policies[0]->options.at(std::string(trust::option::kHostName)),
-              foundation::Value("127.0.0.1"));
+              values::Value("127.0.0.1"));
     EXPECT_EQ(trust.policies[0]->options.count(trust::option::kPlatformAnchor), 1U);
 }
 

@@ -6,14 +6,14 @@ namespace pinwell::test {
 
 https::Request get(const std::string& url) {
     https::Request request;
-    request.url = foundation::URL::fromString(url);
+    request.url = values::URL::fromString(url);
     return request;
 }
 
 https::Request post(const std::string& url, std::string_view body) {
     https::Request request = get(url);
     request.method = "POST";
-    request.body = foundation::toData(body);
+    request.body = base::toData(body);
     request.addHeader("Content-Type", "application/json");
     return request;
 }
@@ -22,7 +22,7 @@ void expectFailure(const Outcome& outcome, https::URLErrorCode code, std::string
     EXPECT_FALSE(outcome.body.has_value());
     EXPECT_FALSE(outcome.response.has_value());
     ASSERT_TRUE(outcome.error.has_value());
-    EXPECT_EQ(outcome.error->domain(), foundation::kURLErrorDomain);
+    EXPECT_EQ(outcome.error->domain(), base::kURLErrorDomain);
     EXPECT_EQ(outcome.error->code(), static_cast<std::int64_t>(code))
         << outcome.error->localizedDescription();
     EXPECT_THAT(outcome.error->localizedFailureReason(), ::testing::HasSubstr(words));
@@ -64,13 +64,12 @@ std::future<Outcome> SessionTest::start(https::Request request) {
 Outcome SessionTest::download(https::Request request) {
     std::promise<Outcome> promise;
     Outcome outcome;
-    delegate.onDownload = [&, inner = delegate.onDownload](https::Task& task,
-                                                           const foundation::URL& location) {
-        outcome.body = foundation::toData(readFile(location.path()));
+    delegate.onDownload = [&, inner = delegate.onDownload](https::Task& task, const values::URL& location) {
+        outcome.body = base::toData(readFile(location.path()));
         outcome.response = task.response();
         inner(task, location);
     };
-    delegate.onComplete = [&](https::Task&, const std::optional<foundation::Error>& error) {
+    delegate.onComplete = [&](https::Task&, const std::optional<base::Error>& error) {
         outcome.error = error;
         promise.set_value(outcome);
     };

@@ -8,13 +8,13 @@
 #include <future>
 #include <thread>
 
-#include "foundation/bytes.h"
-#include "foundation/url.h"
+#include "base/bytes.h"
 #include "https/session.h"
 #include "support/certificate_builder.h"
 #include "support/fake_trust_service.h"
 #include "support/hostile_server.h"
 #include "support/temporary_directory.h"
+#include "values/url.h"
 
 namespace pinwell::test {
 
@@ -34,9 +34,8 @@ class RecordingDelegate : public https::SessionDelegate {
     using Challenge = https::AuthenticationChallenge;
 
     std::function<void(const Challenge&, const https::ChallengeCompletion&)> onChallenge = accept;
-    std::function<void(https::Task&, const foundation::URL&)> onDownload = [](auto&, auto&) {};
-    std::function<void(https::Task&, const std::optional<foundation::Error>&)> onComplete = [](auto&, auto&) {
-    };
+    std::function<void(https::Task&, const values::URL&)> onDownload = [](auto&, auto&) {};
+    std::function<void(https::Task&, const std::optional<base::Error>&)> onComplete = [](auto&, auto&) {};
 
     std::vector<std::string> events;  // "challenge HOST", "downloaded", "complete", "completion"
     std::vector<std::thread::id> threads;
@@ -55,12 +54,11 @@ class RecordingDelegate : public https::SessionDelegate {
         record("challenge " + challenge.host);
         onChallenge(challenge, completion);
     }
-    void didFinishDownloading(https::Session&, https::Task& task, const foundation::URL& location) override {
+    void didFinishDownloading(https::Session&, https::Task& task, const values::URL& location) override {
         record("downloaded");
         onDownload(task, location);
     }
-    void didComplete(https::Session&, https::Task& task,
-                     const std::optional<foundation::Error>& error) override {
+    void didComplete(https::Session&, https::Task& task, const std::optional<base::Error>& error) override {
         record("complete");
         onComplete(task, error);
     }
@@ -68,11 +66,11 @@ class RecordingDelegate : public https::SessionDelegate {
 
 /// The outcome of a task.
 struct Outcome {
-    std::optional<foundation::Data> body;
+    std::optional<base::Data> body;
     std::optional<https::HTTPResponse> response;
-    std::optional<foundation::Error> error;
+    std::optional<base::Error> error;
 
-    std::string text() const { return body ? foundation::toString(*body) : "(no body)"; }
+    std::string text() const { return body ? base::toString(*body) : "(no body)"; }
     int status() const { return response ? response->status : 0; }
 };
 

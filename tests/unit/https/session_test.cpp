@@ -142,7 +142,7 @@ TEST_F(SessionTasks, MayStartADownloadOfAnotherSessionFromACallbackAndFindItRunn
 class EndedSession : public SessionTest {
   protected:
     std::unique_ptr<https::SessionService> service = https::makeSessionService(trust, options);
-    std::optional<foundation::Error> error;
+    std::optional<base::Error> error;
 
     https::DataCompletion noteError() {
         return [this](auto&, auto&, auto& failure) { error = failure; };

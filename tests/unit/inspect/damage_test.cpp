@@ -117,7 +117,7 @@ TEST_F(DamagedTicket, OfNoLengthAtAllIsDescribed) {
 }
 
 TEST_F(DamagedTicket, OfRandomBytesIsDescribedIfItsNameEndsInTicket) {
-    const std::string noise = foundation::toString(irregularData(5000));
+    const std::string noise = base::toString(irregularData(5000));
     const Report report = inspect(write("noise.ticket", noise));
     EXPECT_EQ(report.kind, Kind::ticket);
     EXPECT_EQ(report.outcome, Outcome::refused);
@@ -125,7 +125,7 @@ TEST_F(DamagedTicket, OfRandomBytesIsDescribedIfItsNameEndsInTicket) {
 }
 
 TEST_F(DamagedTicket, WithoutItsMagicIsKnownByItsPayload) {
-    const Report report = inspect(write("CodeResources", foundation::toString(flipped(1, std::byte{8}))));
+    const Report report = inspect(write("CodeResources", base::toString(flipped(1, std::byte{8}))));
     EXPECT_EQ(report.kind, Kind::ticket);
     EXPECT_EQ(report.outcome, Outcome::refused);
 }
@@ -161,7 +161,7 @@ TEST_F(DamagedPlace, AnImageHasTheExitStatusOfTheTool) {
         std::string contents = whole;
         contents[at] = static_cast<char>(contents[at] ^ 1);
         const std::string path = write(image.name, contents);
-        const auto tool = PWHashedFile::initWithFileURL(foundation::URL::fileURLWithPath(path), services());
+        const auto tool = PWHashedFile::initWithFileURL(values::URL::fileURLWithPath(path), services());
         EXPECT_EQ(tool->appropriateExitCode(), 66) << at;
         EXPECT_EQ(inspect::exitStatusOf(inspect(path).outcome), 66) << at;
     }
@@ -202,7 +202,7 @@ TEST_F(DamagedPlace, ADamagedTerminatorIsShownAndDoesNotMatter) {
 
 TEST_F(DamagedPlace, IsGoodExactlyWhenTheToolAcceptsTheStapledTicket) {
     const auto toolAccepts = [&](const std::string& path) {
-        const auto file = PWHashedFile::initWithFileURL(foundation::URL::fileURLWithPath(path), services());
+        const auto file = PWHashedFile::initWithFileURL(values::URL::fileURLWithPath(path), services());
         return file->appropriateExitCode() == kExitOK &&
                DownloadDelegate(file, services()).isExistingTicketValid();
     };

@@ -1,7 +1,8 @@
 // The findings about artefacts of every kind with intact tickets.
 #include <cerrno>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
+#include "base/text.h"
 #include "inspect_fixture.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "support/disk_image_builder.h"
@@ -11,7 +12,7 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::toHex;
+using base::toHex;
 using inspect::FilePlace;
 using inspect::Range;
 using inspect::Signature;
@@ -181,7 +182,7 @@ TEST_F(Inspection, OfAPackageShowsItsChainOfTrailers) {
                                                                 .archive({})
                                                                 .terminator()
                                                                 .unknown("before")
-                                                                .ticket(foundation::toString(ticket))
+                                                                .ticket(base::toString(ticket))
                                                                 .unknown("behind")
                                                                 .build());
     const Report report = inspect(path);
@@ -204,7 +205,7 @@ TEST_F(Inspection, OfAnUnstapledPackageFindsNoTrailers) {
 }
 
 TEST_F(Inspection, OfABareTicketNeedsNoFile) {
-    const std::string ticket = foundation::toString(sealed(bundlePayload()));
+    const std::string ticket = base::toString(sealed(bundlePayload()));
     for (const char* name : {"downloaded.ticket", "CodeResources", "any.name"}) {
         const Report report = inspect(write(name, ticket));
         EXPECT_EQ(report.kind, Kind::ticket) << name;
@@ -215,13 +216,13 @@ TEST_F(Inspection, OfABareTicketNeedsNoFile) {
 }
 
 TEST_F(Inspection, OfAnExecutableTicketFileStillShowsATicket) {
-    const std::string path = write("ticket", foundation::toString(sealed(bundlePayload())));
+    const std::string path = write("ticket", base::toString(sealed(bundlePayload())));
     setMode(path, 0755);
     EXPECT_EQ(inspect(path).kind, Kind::ticket);
 }
 
 TEST_F(Inspection, OfAnExecutableSaysThatItHasNoPlaceForATicket) {
-    const std::string path = write("tool", foundation::toString(ExecutableImageBuilder().build()));
+    const std::string path = write("tool", base::toString(ExecutableImageBuilder().build()));
     setMode(path, 0755);
     const Report report = inspect(path);
     EXPECT_EQ(report.kind, Kind::executable);
@@ -262,9 +263,9 @@ TEST_F(Inspection, OfAnImageFindsTheTicketAfterMoreBlobsThanItDescribes) {
     SuperBlobBuilder superblob;
     for (std::uint32_t i = 0; i < codesign::kMaximumBlobsDescribed + 1; ++i)
         superblob.blob(0x20000 + i, makeBlob(1, {}));
-    superblob.blob(kSampleTicketSlot, ticketBlob(foundation::toString(ticketFor(image))));
+    superblob.blob(kSampleTicketSlot, ticketBlob(base::toString(ticketFor(image))));
     const auto builder = DiskImageBuilder().data(irregularData(100'000)).superblob(superblob);
-    const Report report = inspect(write(image.name, foundation::toString(builder.build())));
+    const Report report = inspect(write(image.name, base::toString(builder.build())));
     EXPECT_EQ(report.outcome, Outcome::good) << report.conclusion;
     EXPECT_THAT(std::get<SuperblobPlace>(report.place).blobs, SizeIs(codesign::kMaximumBlobsDescribed));
     EXPECT_EQ(std::get<SuperblobPlace>(report.place).blobCount, codesign::kMaximumBlobsDescribed + 2);
@@ -274,7 +275,7 @@ TEST_F(Inspection, OfAPackageGoesPastAsManyTrailersAsTheToolDoes) {
     const Artefact package = signedPackage();
     const std::string stapledPackage = package.stapledWith(ticketFor(package));
     std::string trailers;
-    const std::string one = foundation::toString(makeTrailer({}));
+    const std::string one = base::toString(makeTrailer({}));
     for (std::size_t i = 0; i < 2000; ++i) trailers += one;
     const Report report = inspect(write(package.name, stapledPackage + trailers));
     EXPECT_EQ(report.outcome, Outcome::good) << report.conclusion;
@@ -282,8 +283,8 @@ TEST_F(Inspection, OfAPackageGoesPastAsManyTrailersAsTheToolDoes) {
     EXPECT_EQ(std::get<TrailerPlace>(report.place).trailerCount, 2002U);
 
     const std::string large(std::size_t{20} * 1024 * 1024, '\0');
-    const Report beyond = inspect(write(
-        package.name, stapledPackage + foundation::toString(makeTrailer({}, foundation::toData(large)))));
+    const Report beyond =
+        inspect(write(package.name, stapledPackage + base::toString(makeTrailer({}, base::toData(large)))));
     EXPECT_EQ(beyond.outcome, Outcome::good) << beyond.conclusion;
 }
 

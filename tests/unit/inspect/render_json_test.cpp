@@ -1,21 +1,22 @@
 // The object for programs: the same members on every outcome, and always JSON.
 #include "inspect/render_json.h"
 
-#include "foundation/json.h"
-#include "foundation/value.h"
+#include "base/text.h"
 #include "inspect_fixture.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::Value;
 using testing::EndsWith;
 using testing::HasSubstr;
+using values::Value;
 
 class JsonObject : public InspectTest {
   protected:
     static Value parsed(const Report& report) {
-        const auto value = foundation::parseJSON(foundation::asBytes(inspect::renderJson(report)));
+        const auto value = values::parseJSON(base::asBytes(inspect::renderJson(report)));
         EXPECT_TRUE(value);
         return value ? *value : Value();
     }
@@ -32,13 +33,12 @@ TEST_F(JsonObject, SaysTheSameAsTheReport) {
     const Value json = parsed(inspect(stapled(image, ticketFor(image))));
     EXPECT_EQ(json["version"].unsignedIntegerValue(), 1U);
     EXPECT_EQ(text(json["outcome"]), "good");
-    EXPECT_EQ(text(json["codeHash"]["hash"]), foundation::toHex(image.hash));
+    EXPECT_EQ(text(json["codeHash"]["hash"]), base::toHex(image.hash));
     EXPECT_EQ(text(json["place"]["form"]), "superblob");
     EXPECT_EQ(json["place"]["blobs"].array()->size(), 4U);
     EXPECT_EQ(json["ticket"]["certificates"].array()->size(), 3U);
     EXPECT_EQ(json["ticket"]["payload"]["entryCount"].unsignedIntegerValue(), 1U);
-    EXPECT_EQ(text(json["ticket"]["payload"]["matchingEntry"]["codeHash"]["hash"]),
-              foundation::toHex(image.hash));
+    EXPECT_EQ(text(json["ticket"]["payload"]["matchingEntry"]["codeHash"]["hash"]), base::toHex(image.hash));
 }
 
 TEST_F(JsonObject, HasTheSameMembersOnEveryOutcome) {
@@ -53,7 +53,7 @@ TEST_F(JsonObject, OfADamagedTicketHasTheMembersOfAWholeOne) {
     const auto ticketMembers = [&](const std::string& bytes) {
         return membersOf(parsed(inspect(write("a.ticket", bytes)))["ticket"]);
     };
-    const std::string whole = foundation::toString(sealed(TicketPayloadBuilder()));
+    const std::string whole = base::toString(sealed(TicketPayloadBuilder()));
     EXPECT_EQ(ticketMembers(whole.substr(0, 5)), ticketMembers(whole));
     EXPECT_EQ(ticketMembers(whole.substr(0, 200)), ticketMembers(whole));
 }

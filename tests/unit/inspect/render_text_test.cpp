@@ -3,6 +3,7 @@
 
 #include <algorithm>
 
+#include "base/text.h"
 #include "inspect_fixture.h"
 #include "support/process.h"
 
@@ -32,10 +33,10 @@ TEST_F(Page, BeginsWithThePathAndEndsWithTheConclusion) {
     EXPECT_EQ(lines.front(), path);
     EXPECT_EQ(lines.back(), "  The ticket is genuine, lists this file, and is not marked revoked.");
     EXPECT_THAT(lines, Contains("  Kind          disk image (com.ostrel.disk-image-udif)"));
-    EXPECT_THAT(lines, Contains("  Record        2/2/" + foundation::toHex(image.hash)));
+    EXPECT_THAT(lines, Contains("  Record        2/2/" + base::toHex(image.hash)));
     EXPECT_THAT(lines, Contains(AllOf(HasSubstr("slot 0x10002"), HasSubstr("ticket"))));
     EXPECT_THAT(lines,
-                Contains("  Lists         * SHA-256     " + foundation::toHex(image.hash) + "  (this file)"));
+                Contains("  Lists         * SHA-256     " + base::toHex(image.hash) + "  (this file)"));
     EXPECT_THAT(lines, Contains("  Chain         trusted"));
 }
 
@@ -73,8 +74,7 @@ TEST_F(Page, LetsNothingOfAFileDriveTheTerminal) {
     fields.leaf.subject = {{"CN", "evil\x1b[31m\nleaf"}};
     const IssuedChain evil = fields.issue();
     const Data ticket = SatchelBuilder::of(evil, TicketPayloadBuilder().build()).build();
-    const std::string text =
-        renderText(inspect(write("a\x1b[2Jb\n.ticket", foundation::toString(ticket))), false);
+    const std::string text = renderText(inspect(write("a\x1b[2Jb\n.ticket", base::toString(ticket))), false);
     EXPECT_TRUE(std::none_of(text.begin(), text.end(), [](char c) { return c == '\x1b'; })) << text;
     EXPECT_THAT(text, HasSubstr("a\\x1b[2Jb\\n.ticket"));
     EXPECT_THAT(linesOf(text), Not(Contains(StartsWith("leaf"))));

@@ -8,7 +8,7 @@
 #include <cerrno>
 #include <limits>
 
-#include "foundation/file_io.h"
+#include "base/handle.h"
 #include "support/disk_image_builder.h"
 #include "support/package_builder.h"
 #include "support/temporary_directory.h"
@@ -17,10 +17,10 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::asBytes;
-using foundation::Data;
-using foundation::FileDescriptor;
-using foundation::toData;
+using base::asBytes;
+using base::Data;
+using base::FileDescriptor;
+using base::toData;
 using ticket::ByteView;
 using ticket::DiskImage;
 using ticket::FlatPackage;

@@ -13,8 +13,8 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::asBytes;
-using foundation::Data;
+using base::asBytes;
+using base::Data;
 using ticket::ByteView;
 using ticket::Step;
 using ticket::TrustedRoots;
@@ -161,7 +161,7 @@ TEST_F(Judging, AgreesWithTheToolWhicheverByteIsWrong) {
     TemporaryDirectory platform;
     writeFile(platform / "roots/root.pem", chain.root.pem());
     const auto service = trust::makeTrustService(
-        foundation::PlatformDirectory(platform.path()), [](auto) {}, [] { return foundation::Date{kNow}; });
+        config::PlatformDirectory(platform.path()), [](auto) {}, [] { return values::Date{kNow}; });
     const std::size_t certificatesEnd = sound.size() - 72 - payload.size();
     for (std::size_t i = 0; i<sound.size(); i += i> 24 && i < certificatesEnd ? 11 : 1) {
         Data damaged = sound;

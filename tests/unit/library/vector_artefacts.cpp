@@ -2,13 +2,13 @@
 
 #include <stdexcept>
 
-#include "foundation/json.h"
 #include "support/process.h"
+#include "values/json.h"
 
 namespace pinwell::test {
 
 VectorArtefacts::VectorArtefacts() {
-    const auto file = foundation::parseJSON(foundation::asBytes(readFile(VECTORS_DIRECTORY "/vectors.json")));
+    const auto file = values::parseJSON(base::asBytes(readFile(VECTORS_DIRECTORY "/vectors.json")));
     if (!file) throw std::runtime_error(file.error().localizedDescription());
     const ProcessResult made =
         runProcess({.executable = "/usr/bin/python3",

@@ -4,13 +4,13 @@
 #include <string>
 #include <vector>
 
-#include "foundation/value.h"
 #include "support/temporary_directory.h"
+#include "values/value.h"
 
 namespace pinwell::test {
 
 struct Vector {
-    foundation::Value expected;
+    values::Value expected;
     std::string path;
 };
 

@@ -10,7 +10,7 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::Value;
+using values::Value;
 using Failed = std::vector<std::pair<std::string, std::string>>;
 
 constexpr std::size_t kFewestVectors = 50;
@@ -114,8 +114,8 @@ TEST_F(Vectors, HaveTicketsThatTheCxxInterfaceJudgesAlike) {
         const std::string hash = textOf(pinwell_result_code_hash, result);
         if (bytes.empty() || hash.empty()) continue;
         ++count;
-        const ticket::ByteView hashes[] = {foundation::asBytes(hash)};
-        const auto validation = ticket::validate(foundation::asBytes(bytes), cxxRoots, 0, hashes);
+        const ticket::ByteView hashes[] = {base::asBytes(hash)};
+        const auto validation = ticket::validate(base::asBytes(bytes), cxxRoots, 0, hashes);
         const pinwell_verdict verdict = pinwell_result_verdict(result.get());
         EXPECT_EQ(validation.isAcceptable(), verdict == PINWELL_VERDICT_GOOD);
         EXPECT_EQ(validation.isGenuine && validation.isRevoked, verdict == PINWELL_VERDICT_REVOKED);

@@ -29,7 +29,7 @@ void expectConfigurationFailure(const std::function<void()>& work, const std::st
 #if PINWELL_WITHOUT_POSTGRESQL
 TEST(WithoutPostgres, RefusesADatabaseAndNamesTheFile) {
     const TemporaryDirectory directory;
-    const auto service = ServiceDirectory::create(directory / "service", {}, foundation::Date::now());
+    const auto service = ServiceDirectory::create(directory / "service", {}, values::Date::now());
     writeFile(service.descriptionPath(),
               std::string_view(R"({"hosts":["localhost"],"store":"postgresql:///lumora"})"));
     const auto open = [&] { openStore(ServiceDirectory::open(service.path())); };
@@ -39,7 +39,7 @@ TEST(WithoutPostgres, RefusesADatabaseAndNamesTheFile) {
 
 TEST(WithoutPostgres, RefusesToMigrate) {
     const TemporaryDirectory directory;
-    const auto service = ServiceDirectory::create(directory / "service", {}, foundation::Date::now());
+    const auto service = ServiceDirectory::create(directory / "service", {}, values::Date::now());
     expectConfigurationFailure([&] { migrate(service, "postgresql:///lumora"); }, "built without PostgreSQL");
 }
 #endif

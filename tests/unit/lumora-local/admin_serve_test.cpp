@@ -8,18 +8,17 @@
 #include <thread>
 
 #include "admin_instance.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
 #include "lumora-local/event.h"
 #include "lumora-local/sqlite_store.h"
 #include "running_service.h"
 #include "serving_instance.h"
 #include "support/file_size_limit.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Value;
 using pinwell::test::ProcessResult;
 using pinwell::test::writeFile;
 using test::AdminAnswer;
@@ -28,12 +27,13 @@ using test::AdminInstance;
 using test::bodyFor;
 using test::recordNamed;
 using test::ServiceWithClients;
+using values::Value;
 
 constexpr const char* kTickets = "/v1/tickets";
 constexpr const char* kRevocations = "/v1/revocations";
 
 Value parsed(const AdminAnswer& answer) {
-    auto value = foundation::parseJSON(foundation::asBytes(answer.body));
+    auto value = values::parseJSON(base::asBytes(answer.body));
     if (!value) throw std::runtime_error("no JSON: " + answer.body);
     return *std::move(value);
 }
@@ -101,7 +101,7 @@ TEST_F(AdminServeTest, ListsEveryHashInTheTicketTheRecordsOwnFirst) {
     ASSERT_EQ(client.post(kTickets, bodyFor(recordNamed(1), hashes)).status, 201);
     const Value found = parsed(client.get("/v1/records?hash=" + recordNamed(2)));
     ASSERT_EQ(found["records"].array()->size(), 1U);
-    const foundation::Array& listed = *found["records"][0]["hashes"].array();
+    const values::Array& listed = *found["records"][0]["hashes"].array();
     ASSERT_EQ(listed.size(), 2U);
     EXPECT_EQ(*listed[0].string(), recordNamed(1));
     EXPECT_EQ(*listed[1].string(), recordNamed(2));

@@ -5,17 +5,17 @@
 
 #include <map>
 
-#include "foundation/json.h"
-#include "foundation/value.h"
 #include "lumora-local/admin_routes.h"
 #include "lumora-local/sqlite_store.h"
 #include "support/temporary_directory.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Value;
 using pinwell::test::TemporaryDirectory;
+using values::Value;
 
 class AdminServiceTest : public testing::Test {
   protected:
@@ -69,7 +69,7 @@ class AdminServiceTest : public testing::Test {
 
     static void expectProblem(const Answer& answer) {
         EXPECT_EQ(answer.contentType, "application/problem+json");
-        const auto document = foundation::parseJSON(foundation::asBytes(answer.body));
+        const auto document = values::parseJSON(base::asBytes(answer.body));
         ASSERT_TRUE(document) << answer.body;
         EXPECT_EQ(*(*document)["type"].string(), "about:blank");
         EXPECT_EQ((*document)["status"].unsignedIntegerValue(), static_cast<std::uint64_t>(answer.status));
@@ -263,13 +263,13 @@ TEST_F(AdminServiceTest, ShowsLabelsInAnyEncoding) {
     Record record;
     record.name = "2/2/" + std::string(40, 'a');
     record.label = "caf\xE9\x1B[2J";
-    record.hashes = {{2, foundation::Data(20, std::byte{0xAA})}};
-    store_->put(Environment::production, {{record, foundation::toData("ticket")}},
-                {foundation::Date{100}, "tester", std::nullopt, "", false});
+    record.hashes = {{2, base::Data(20, std::byte{0xAA})}};
+    store_->put(Environment::production, {{record, base::toData("ticket")}},
+                {values::Date{100}, "tester", std::nullopt, "", false});
     const RequestHead request = head("GET", "/v1/records", "reader");
     for (const AdminRoute& route : readingRoutes(*store_)) {
         const Answer answer = route.handle({request, route.path, {}, {}, std::nullopt, {}});
-        EXPECT_TRUE(foundation::parseJSON(foundation::asBytes(answer.body))) << answer.body;
+        EXPECT_TRUE(values::parseJSON(base::asBytes(answer.body))) << answer.body;
         EXPECT_NE(answer.body.find("caf"), std::string::npos);
         EXPECT_EQ(answer.body.find('\x1B'), std::string::npos);
     }
@@ -288,11 +288,11 @@ TEST(RecordSearchOf, AcceptsItsParameters) {
 
 TEST(RecordSearchOf, AcceptsAHashByItsDigitsOrByName) {
     const std::string hex(40, 'a');
-    const foundation::Data hash(20, std::byte{0xAA});
+    const base::Data hash(20, std::byte{0xAA});
     EXPECT_EQ(recordSearchOf({{"hash", hex}}).hash, hash);
     EXPECT_EQ(recordSearchOf({{"hash", "2/3/" + hex}}).hash, hash);
     EXPECT_EQ(recordSearchOf({{"hash", "1/" + hex}}).hash, hash);
-    EXPECT_EQ(recordSearchOf({{"hash", std::string(96, 'a')}}).hash, foundation::Data(48, std::byte{0xAA}));
+    EXPECT_EQ(recordSearchOf({{"hash", std::string(96, 'a')}}).hash, base::Data(48, std::byte{0xAA}));
 }
 
 TEST(RecordSearchOf, RefusesParametersOutOfBounds) {
@@ -326,7 +326,7 @@ TEST(EventSearchOf, AcceptsItsParameters) {
                                               {"environment", "development"},
                                               {"after", "-5:7"}});
     EXPECT_EQ(search.record, "2/2/ab");
-    EXPECT_EQ(search.since, foundation::Date{100});
+    EXPECT_EQ(search.since, values::Date{100});
     EXPECT_EQ(search.environment, Environment::development);
     EXPECT_EQ(search.after, (EventCursor{-5, 7}));
     EXPECT_EQ(toString(*search.after), "-5:7");

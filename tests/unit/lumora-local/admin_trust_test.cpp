@@ -9,11 +9,11 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Date;
 using pinwell::test::writeFile;
 using test::AdminAnswer;
 using test::AdminClient;
 using test::AdminInstance;
+using values::Date;
 
 constexpr std::int64_t kYear = std::int64_t{366} * 86'400;
 

@@ -5,17 +5,17 @@
 #include <atomic>
 #include <thread>
 
-#include "foundation/base64.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
+#include "base/text.h"
 #include "lumora-local/lookup.h"
 #include "lumora-local/sqlite_store.h"
 #include "support/temporary_directory.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Data;
+using base::Data;
 using pinwell::test::TemporaryDirectory;
 
 std::shared_ptr<const KeptAnswer> kept(const std::string& contents) {
@@ -79,8 +79,8 @@ class CachedLookups : public testing::Test {
 
     static SignedRecord record(int fill, int ticket, bool revoked = false) {
         const CodeHash hash{2, Data(20, static_cast<std::byte>(fill))};
-        return {{recordName(hash), "label", {hash}, revoked, false, foundation::Date::now()},
-                foundation::toData("ticket " + std::to_string(ticket))};
+        return {{recordName(hash), "label", {hash}, revoked, false, values::Date::now()},
+                base::toData("ticket " + std::to_string(ticket))};
     }
 
     static void put(SqliteStore& store, const SignedRecord& record) {
@@ -96,10 +96,10 @@ class CachedLookups : public testing::Test {
                                "/database/1/com.ostrel.tm.ticket-delivery/production/public/records/lookup",
                                "localhost", "application/json", ""};
         const Answer answer = lookups.answerLookup(head, R"({"records":[{"recordName":")" + name + R"("}]})");
-        const auto document = foundation::parseJSON(foundation::asBytes(answer.body));
+        const auto document = values::parseJSON(base::asBytes(answer.body));
         const auto& value = (*document)["records"][0]["fields"]["signedTicket"]["value"];
         if (value.string() == nullptr) return "";
-        return foundation::toString(*foundation::decodeBase64(*value.string()));
+        return base::toString(*base::decodeBase64(*value.string()));
     }
 
     const TemporaryDirectory directory_;

@@ -9,7 +9,7 @@
 
 #include <string>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "support/openssl_handles.h"
 
 namespace pinwell::lumora::test {
@@ -34,7 +34,7 @@ inline bool carries(X509* certificate, const std::string& oid) {
     return X509_get_ext_by_OBJ(certificate, object.get(), -1) >= 0;
 }
 
-inline const unsigned char* octets(foundation::ByteView bytes) {
+inline const unsigned char* octets(base::ByteView bytes) {
     return reinterpret_cast<const unsigned char*>(bytes.data());
 }
 

@@ -2,10 +2,10 @@
 
 #include <filesystem>
 
-#include "foundation/json.h"
-#include "foundation/value.h"
 #include "running_service.h"
 #include "support/environment.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -105,7 +105,7 @@ class RecordCommands : public CommandLine {
 TEST_F(RecordCommands, IssueForARemoteArtefact) {
     const Outcome issued = issueRecord({"--json"});
     ASSERT_EQ(issued.exitStatus, 0) << issued.err;
-    const auto document = foundation::parseJSON(foundation::asBytes(issued.out));
+    const auto document = values::parseJSON(base::asBytes(issued.out));
     ASSERT_TRUE(document) << issued.out;
     EXPECT_EQ(*(*document)["records"][0]["recordName"].string(), record_);
     EXPECT_EQ(*(*document)["records"][0]["label"].string(), "huge.dmg");
@@ -179,7 +179,7 @@ TEST_F(CommandLine, TakesANewcomerFromNothingToARevokedTicket) {
     EXPECT_TRUE(revoked.out.starts_with("revoked\t2/2/")) << revoked.out;
 
     const Outcome list = runProgram({"list", service_, "--json"});
-    const auto document = foundation::parseJSON(foundation::asBytes(list.out));
+    const auto document = values::parseJSON(base::asBytes(list.out));
     ASSERT_TRUE(document) << list.out;
     EXPECT_EQ((*document)["records"].array()->size(), 1U);
     EXPECT_TRUE((*document)["records"][0]["revoked"].boolValue());

@@ -4,23 +4,23 @@
 
 #include <map>
 
-#include "foundation/byte_reader.h"
-#include "foundation/bytes.h"
-#include "foundation/date.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
+#include "base/byte_io.h"
+#include "base/bytes.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/service_directory.h"
 #include "lumora-local/sqlite_store.h"
 #include "support/temporary_directory.h"
+#include "values/date.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteReader;
-using foundation::Data;
-using foundation::Date;
+using base::ByteReader;
+using base::Data;
 using pinwell::test::TemporaryDirectory;
+using values::Date;
 
 /// Artefacts by path, without any files.
 class FakeHasher final : public ArtefactHasher {
@@ -219,7 +219,7 @@ TEST_F(CommandsTest, ListsForPrograms) {
     hasher_.artefacts["odd"] = artefact("odd\n\xFF.app", hashOf(4, 3));
     issue(registry_, artefacts({"odd"}, true));
     const std::string text = recordsAsJson(store_.list(Environment::production));
-    const auto document = foundation::parseJSON(foundation::asBytes(text));
+    const auto document = values::parseJSON(base::asBytes(text));
     ASSERT_TRUE(document) << text;
     const auto& record = (*document)["records"][0];
     EXPECT_EQ(*record["recordName"].string(), recordName(hashOf(4, 3)));

@@ -13,7 +13,7 @@
 namespace pinwell::lumora::test {
 namespace {
 
-using foundation::FileDescriptor;
+using base::FileDescriptor;
 using pinwell::test::require;
 
 constexpr int kTick = 20;  // milliseconds between two checks for the end

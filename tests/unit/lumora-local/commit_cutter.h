@@ -6,7 +6,7 @@
 #include <thread>
 #include <vector>
 
-#include "foundation/file_io.h"
+#include "base/handle.h"
 #include "support/temporary_directory.h"
 
 namespace pinwell::lumora::test {
@@ -36,11 +36,11 @@ class CommitCutter {
 
   private:
     void listen();
-    void pass(foundation::FileDescriptor client);
+    void pass(base::FileDescriptor client);
 
     const std::string serverDirectory_;
     const pinwell::test::TemporaryDirectory directory_;
-    foundation::FileDescriptor listener_;
+    base::FileDescriptor listener_;
     std::atomic<Cut> next_{Cut::nothing};
     std::atomic<int> cuts_{0};
     std::atomic<bool> stopping_{false};

@@ -5,13 +5,14 @@
 #include <nlohmann/json.hpp>
 #include <set>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
+#include "base/text.h"
 #include "lumora-local/sha256.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Date;
+using values::Date;
 
 Event revocation() {
     Event event;
@@ -33,7 +34,7 @@ TEST(EventHash, IsTakenOverEachFieldWithItsLength) {
                              ",20:2026-11-18T11:06:40Z,5:alice,7:revoked,10:production,6:2/2/00,5:A.app,"
                              "11:compromised,8:key lost,64:" +
                              std::string(64, 'a') + ",";
-    EXPECT_EQ(hashOf(revocation()), foundation::toHex(sha256(foundation::asBytes(text))));
+    EXPECT_EQ(hashOf(revocation()), base::toHex(sha256(base::asBytes(text))));
 }
 
 TEST(EventHash, ChangesWithEveryField) {

@@ -12,8 +12,8 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Date;
 using pinwell::test::TemporaryDirectory;
+using values::Date;
 
 class HistoryTest : public testing::Test {
   protected:
@@ -29,7 +29,7 @@ class HistoryTest : public testing::Test {
         entry.record.name = name;
         entry.record.label = name;
         entry.record.revoked = revoked;
-        entry.ticket = foundation::toData(name);
+        entry.ticket = base::toData(name);
         store.put(Environment::production, {entry}, {Date{77}, "tester", std::nullopt, "", false});
     }
 

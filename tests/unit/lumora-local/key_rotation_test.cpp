@@ -16,12 +16,12 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Data;
-using foundation::Date;
+using base::Data;
 using pinwell::test::readFile;
 using pinwell::test::ScopedVariable;
 using pinwell::test::TemporaryDirectory;
 using pinwell::test::writeFile;
+using values::Date;
 
 constexpr std::int64_t kOneDay = 24 * 60 * 60;
 constexpr std::int64_t kMonth = 30 * kOneDay;
@@ -47,7 +47,7 @@ bool hasCertificateOf(const Data& ticket, const std::string& pemPath) {
     const int length = i2d_X509(certificate.get(), &der);
     const std::string wanted(reinterpret_cast<const char*>(der), static_cast<std::size_t>(length));
     OPENSSL_free(der);
-    return foundation::toString(ticket).find(wanted) != std::string::npos;
+    return base::toString(ticket).find(wanted) != std::string::npos;
 }
 
 class Keys : public testing::Test {

@@ -8,13 +8,13 @@
 #include <array>
 #include <exception>
 
-#include "foundation/file_io.h"
+#include "base/handle.h"
 #include "support/require.h"
 
 namespace pinwell::lumora::test {
 namespace {
 
-using foundation::FileDescriptor;
+using base::FileDescriptor;
 using pinwell::test::require;
 
 constexpr char kDone = 'd';

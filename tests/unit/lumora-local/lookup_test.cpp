@@ -4,18 +4,18 @@
 
 #include <stdexcept>
 
-#include "foundation/base64.h"
-#include "foundation/bytes.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
+#include "base/bytes.h"
+#include "base/text.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Array;
-using foundation::Data;
-using foundation::Dictionary;
-using foundation::Value;
+using base::Data;
+using values::Array;
+using values::Dictionary;
+using values::Value;
 
 const std::string kAsset(64, 'a');
 constexpr const char* kPath = "/database/1/com.ostrel.tm.ticket-delivery/production/public/records/lookup";
@@ -26,18 +26,17 @@ class FakeRecords final : public RecordSource {
     std::optional<Delivery> findTicket(Environment environment, const std::string& name) override {
         if (failing) throw std::runtime_error("the disk is gone");
         if (environment == Environment::development) {
-            return name == "in-development" ? std::optional(Delivery{foundation::toData("dev"), {}})
-                                            : std::nullopt;
+            return name == "in-development" ? std::optional(Delivery{base::toData("dev"), {}}) : std::nullopt;
         }
         ++lookups;
         if (name == "mebibyte") return Delivery{Data(1024 * 1024), {}};
-        if (name == "inline") return Delivery{foundation::toData("ticket"), {}};
+        if (name == "inline") return Delivery{base::toData("ticket"), {}};
         if (name == "large") return Delivery{{}, Delivery::Asset{kAsset, 2'000'000}};
         return std::nullopt;
     }
     std::optional<Data> findAsset(const std::string& identifier) override {
         if (identifier != kAsset) return std::nullopt;
-        return foundation::toData(std::string("bytes\0of\xFFit", 11));
+        return base::toData(std::string("bytes\0of\xFFit", 11));
     }
     std::size_t countRecords() override { return 2; }
 
@@ -56,7 +55,7 @@ class LookupTest : public testing::Test {
     int bodyStatus(std::string_view body) const { return service_.answerLookup(lookupHead(), body).status; }
 
     static Value parse(const Answer& answer) {
-        auto value = foundation::parseJSON(foundation::asBytes(answer.body));
+        auto value = values::parseJSON(base::asBytes(answer.body));
         EXPECT_TRUE(value) << answer.body;
         return value ? *std::move(value) : Value();
     }
@@ -78,8 +77,8 @@ TEST_F(LookupTest, DeliversATicketInline) {
     const Value answer = lookup(R"({"records":[{"recordName":"inline"}]})");
     const Value& record = answer["records"][0];
     EXPECT_EQ(*record["recordName"].string(), "inline");
-    EXPECT_EQ(foundation::decodeBase64(*record["fields"]["signedTicket"]["value"].string()),
-              foundation::toData("ticket"));
+    EXPECT_EQ(base::decodeBase64(*record["fields"]["signedTicket"]["value"].string()),
+              base::toData("ticket"));
     EXPECT_TRUE(record["fields"]["signedTicketAsset"].isNil());
     EXPECT_TRUE(record["reason"].isNil());
 }
@@ -279,7 +278,7 @@ TEST_F(LookupTest, ServesAnAssetUnderAnyPlainName) {
         ASSERT_TRUE(answer);
         EXPECT_EQ(answer->status, 200) << name;
         ASSERT_NE(answer->asset, nullptr);
-        EXPECT_EQ(*answer->asset, foundation::toData(std::string("bytes\0of\xFFit", 11)));
+        EXPECT_EQ(*answer->asset, base::toData(std::string("bytes\0of\xFFit", 11)));
         EXPECT_EQ(answer->contentType, "application/octet-stream");
     }
 }

@@ -23,7 +23,7 @@ using test::RunningService;
 constexpr const char* kUnknownName = "2/2/00000000000000000000000000000000000000ff";
 
 CodeHash hashOfSample(int fill) {
-    return {2, foundation::Data(20, static_cast<std::byte>(fill))};
+    return {2, base::Data(20, static_cast<std::byte>(fill))};
 }
 
 std::string bodyFor(const std::string& name) {

@@ -16,8 +16,8 @@ using std::chrono::microseconds;
 ServiceFacts sampleFacts() {
     ServiceFacts facts;
     facts.version = "1.2";
-    facts.started = foundation::Date{1'700'000'000};
-    facts.certificates = {{"server", foundation::Date{1'800'000'000}}};
+    facts.started = values::Date{1'700'000'000};
+    facts.certificates = {{"server", values::Date{1'800'000'000}}};
     facts.store = StoreFacts{3, 5, std::nullopt};
     return facts;
 }

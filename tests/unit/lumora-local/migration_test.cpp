@@ -16,19 +16,19 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Data;
-using foundation::Date;
+using base::Data;
 using pinwell::test::ProcessResult;
 using pinwell::test::readFile;
 using pinwell::test::TemporaryDirectory;
 using pinwell::test::writeFile;
 using test::PostgresCluster;
+using values::Date;
 
 constexpr Environment kProduction = Environment::production;
 constexpr const char* kRecord = "2/2/00112233445566778899aabbccddeeff00112233";
 
 SignedRecord makeRecord(const std::string& name, std::string_view ticket, bool revoked = false) {
-    Data hash = foundation::toData(name);
+    Data hash = base::toData(name);
     hash.resize(20);
     return {{name,
              "Sample\xff.app",
@@ -36,7 +36,7 @@ SignedRecord makeRecord(const std::string& name, std::string_view ticket, bool r
              revoked,
              name.size() > 1,
              Date{77}},
-            foundation::toData(ticket)};
+            base::toData(ticket)};
 }
 
 class MigrationTest : public testing::Test {

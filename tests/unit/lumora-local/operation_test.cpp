@@ -11,20 +11,19 @@
 #include <array>
 #include <filesystem>
 
-#include "foundation/file_io.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
+#include "base/handle.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/service_settings.h"
 #include "running_service.h"
 #include "support/environment.h"
 #include "support/process.h"
 #include "support/text.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Value;
 using pinwell::test::linesOf;
 using pinwell::test::readFile;
 using pinwell::test::ScopedVariable;
@@ -33,9 +32,10 @@ using pinwell::test::writeFile;
 using test::Outcome;
 using test::RunningService;
 using test::runProgram;
+using values::Value;
 
 CodeHash sampleHash(int fill) {
-    return {2, foundation::Data(20, static_cast<std::byte>(fill))};
+    return {2, base::Data(20, static_cast<std::byte>(fill))};
 }
 
 std::string lookupOf(const std::string& name) {
@@ -43,7 +43,7 @@ std::string lookupOf(const std::string& name) {
 }
 
 Value parsed(const std::string& text) {
-    auto value = foundation::parseJSON(foundation::asBytes(text));
+    auto value = values::parseJSON(base::asBytes(text));
     if (!value) throw std::runtime_error("no JSON: " + text);
     return *std::move(value);
 }
@@ -118,7 +118,7 @@ class ManagerSocket {
     }
 
   private:
-    foundation::FileDescriptor socket_;
+    base::FileDescriptor socket_;
 };
 
 TEST(ServiceManagerMessages, ReportReadinessAndTheEnd) {

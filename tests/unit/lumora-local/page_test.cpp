@@ -17,11 +17,11 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Data;
-using foundation::Date;
+using base::Data;
 using testing::AllOf;
 using testing::HasSubstr;
 using testing::Not;
+using values::Date;
 
 constexpr const char* kClient = "anna.example";
 const std::string kMarkup = "<script>alert(1)</script>\"'><b onclick=x>&amp;";

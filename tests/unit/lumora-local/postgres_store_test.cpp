@@ -15,13 +15,13 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Data;
-using foundation::Date;
+using base::Data;
 using test::CommitCutter;
 using test::kOccasion;
 using test::kProduction;
 using test::makeRecord;
 using test::PostgresCluster;
+using values::Date;
 
 PostgresPlace placeOf(const std::string& url) {
     return {.url = url, .named = "service.json: \"store\""};

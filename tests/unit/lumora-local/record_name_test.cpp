@@ -5,7 +5,7 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Data;
+using base::Data;
 
 const Data kTwentyBytes(20, std::byte{0xAB});
 const Data kFortyEightBytes(48, std::byte{0x01});

@@ -7,6 +7,7 @@
 #include <memory>
 #include <thread>
 
+#include "base/text.h"
 #include "lumora-local/event.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/sha256.h"
@@ -17,11 +18,11 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Data;
-using foundation::Date;
+using base::Data;
 using test::kOccasion;
 using test::kProduction;
 using test::makeRecord;
+using values::Date;
 
 class RecordStoreTest : public test::EveryStoreTest {};
 
@@ -32,7 +33,7 @@ TEST_P(RecordStoreTest, DeliversATicketInline) {
     store.put(kProduction, {makeRecord("a", "ticket")}, kOccasion);
     const auto delivery = store.findTicket(kProduction, "a");
     ASSERT_TRUE(delivery);
-    EXPECT_EQ(delivery->inlineTicket, foundation::toData("ticket"));
+    EXPECT_EQ(delivery->inlineTicket, base::toData("ticket"));
     EXPECT_FALSE(delivery->asset);
 }
 
@@ -45,14 +46,14 @@ TEST_P(RecordStoreTest, DeliversATicketAsAnAsset) {
     ASSERT_TRUE(delivery && delivery->asset);
     EXPECT_FALSE(delivery->inlineTicket);
     EXPECT_EQ(delivery->asset->size, 6U);
-    EXPECT_EQ(delivery->asset->identifier, foundation::toHex(sha256(foundation::toData("ticket"))));
-    EXPECT_EQ(store.findAsset(delivery->asset->identifier), foundation::toData("ticket"));
+    EXPECT_EQ(delivery->asset->identifier, base::toHex(sha256(base::toData("ticket"))));
+    EXPECT_EQ(store.findAsset(delivery->asset->identifier), base::toData("ticket"));
 }
 
 TEST_P(RecordStoreTest, HasNoAssetForAnInlineTicket) {
     RecordStore& store = openAndKeep();
     store.put(kProduction, {makeRecord("a", "ticket")}, kOccasion);
-    EXPECT_EQ(store.findAsset(foundation::toHex(sha256(foundation::toData("ticket")))), std::nullopt);
+    EXPECT_EQ(store.findAsset(base::toHex(sha256(base::toData("ticket")))), std::nullopt);
 }
 
 TEST_P(RecordStoreTest, WithdrawsTheAssetOfAReplacedRecord) {
@@ -63,7 +64,7 @@ TEST_P(RecordStoreTest, WithdrawsTheAssetOfAReplacedRecord) {
     const std::string identifier = store.findTicket(kProduction, "a")->asset->identifier;
     store.put(kProduction, {makeRecord("a", "another")}, kOccasion);
     EXPECT_EQ(store.findAsset(identifier), std::nullopt);
-    EXPECT_EQ(store.findTicket(kProduction, "a")->inlineTicket, foundation::toData("another"));
+    EXPECT_EQ(store.findTicket(kProduction, "a")->inlineTicket, base::toData("another"));
 }
 
 TEST_P(RecordStoreTest, FindsNothingUnderOtherNames) {
@@ -127,7 +128,7 @@ TEST_P(RecordStoreTest, FindsManyTicketsInTheOrderOfTheirNames) {
     EXPECT_EQ(found[0]->asset->size, 6U);
     EXPECT_EQ(found[4]->asset->identifier, found[0]->asset->identifier);
     ASSERT_TRUE(found[3]);
-    EXPECT_EQ(found[3]->inlineTicket, foundation::toData("first"));
+    EXPECT_EQ(found[3]->inlineTicket, base::toData("first"));
     for (const std::size_t none : {1U, 2U, 5U, 6U, 7U}) EXPECT_FALSE(found[none]) << names[none];
     EXPECT_TRUE(store.findTickets(kProduction, {}).empty());
     EXPECT_TRUE(store.findTickets(kProduction, std::vector<std::string>{"a"}).front());
@@ -183,7 +184,7 @@ TEST_P(RecordStoreTest, LogsEachChangeOfARecord) {
     EXPECT_EQ(events[2].reason, Reason::compromised);
     EXPECT_EQ(events[2].comment, "key lost");
     EXPECT_EQ(events[2].label, "Sample.app");
-    EXPECT_EQ(events[2].ticket, foundation::toHex(sha256(foundation::toData("revoked ticket"))));
+    EXPECT_EQ(events[2].ticket, base::toHex(sha256(base::toData("revoked ticket"))));
     EXPECT_EQ(events[0].previous, hashBeforeTheFirstEvent());
     EXPECT_EQ(events[3].previous, events[2].hash);
     EXPECT_EQ(events[3].hash, hashOf(events[3]));
@@ -266,7 +267,7 @@ TEST_P(RecordStoreTest, RevokesTheHashesOfEarlierTicketsToo) {
     std::optional<Record> record = store.find(kProduction, "2/2/a");
     ASSERT_TRUE(record);
     EXPECT_EQ(record->hashes, listing("2/2/a", {1, 2}).record.hashes);
-    SignedRecord revoked{*record, foundation::toData("ticket")};
+    SignedRecord revoked{*record, base::toData("ticket")};
     revoked.record.revoked = true;
     store.put(kProduction, {revoked}, kOccasion);
     EXPECT_THROW(store.put(kProduction, {listing("2/2/b", {2})}, kOccasion), RevokedFailure);
@@ -389,7 +390,7 @@ TEST_P(RecordStoreTest, KeepsEveryByteOfTexts) {
     const std::string bytes("a\xff\xc3\"\\{},NULL\n\0z", 16);
     SignedRecord entry = makeRecord("a", "ticket");
     entry.record.label = bytes;
-    entry.ticket = foundation::toData(bytes);
+    entry.ticket = base::toData(bytes);
     store.put(kProduction, {entry}, {Date{100}, bytes, std::nullopt, bytes, false});
     EXPECT_EQ(store.find(kProduction, "a")->label, bytes);
     EXPECT_EQ(store.findTicket(kProduction, "a")->inlineTicket, entry.ticket);
@@ -423,8 +424,7 @@ TEST_P(RecordStoreTest, WalksAllItsContents) {
                                 EXPECT_EQ(entry.record.hashes, asset.record.hashes);
                                 EXPECT_EQ(entry.record.asAsset, entry.record.name == "b");
                                 records.push_back(std::string(toString(environment)) + " " +
-                                                  entry.record.name + " " +
-                                                  foundation::toString(entry.ticket));
+                                                  entry.record.name + " " + base::toString(entry.ticket));
                             }});
     EXPECT_EQ(events, (std::vector<std::string>{"z", "b", "a"}));
     EXPECT_EQ(records,

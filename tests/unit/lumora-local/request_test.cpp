@@ -11,10 +11,10 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Data;
-using foundation::Date;
+using base::Data;
 using test::kProduction;
 using test::makeRecord;
+using values::Date;
 
 class RequestTest : public test::EveryStoreTest {
   protected:
@@ -43,16 +43,16 @@ TEST_P(RequestTest, ChangesNothingWhenRepeated) {
     const PutOutcome again = put("second", occasionOf("k", "d", 200));
     EXPECT_EQ(again.event.hash, first.event.hash);
     EXPECT_EQ(again.event.action, Action::issued);
-    EXPECT_EQ(again.earlier, foundation::toData("first"));
+    EXPECT_EQ(again.earlier, base::toData("first"));
     EXPECT_EQ(events().size(), 1U);
-    EXPECT_EQ(store().findTicket(kProduction, "a")->inlineTicket, foundation::toData("first"));
+    EXPECT_EQ(store().findTicket(kProduction, "a")->inlineTicket, base::toData("first"));
 }
 
 TEST_P(RequestTest, KeepsItsTicketWhenTheRecordGetsAnother) {
     put("first", occasionOf("k", "d"));
     put("second", occasionOf("l", "e"));
-    EXPECT_EQ(put("third", occasionOf("k", "d")).earlier, foundation::toData("first"));
-    EXPECT_EQ(store().findTicket(kProduction, "a")->inlineTicket, foundation::toData("second"));
+    EXPECT_EQ(put("third", occasionOf("k", "d")).earlier, base::toData("first"));
+    EXPECT_EQ(store().findTicket(kProduction, "a")->inlineTicket, base::toData("second"));
 }
 
 TEST_P(RequestTest, IsKnownToOtherInstances) {

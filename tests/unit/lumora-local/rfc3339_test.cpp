@@ -5,7 +5,7 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Date;
+using values::Date;
 
 TEST(Rfc3339, WritesUtcInWholeSeconds) {
     EXPECT_EQ(toRfc3339(Date{1'795'000'000}), "2026-11-18T11:06:40Z");

@@ -16,7 +16,7 @@
 #include <filesystem>
 #include <stdexcept>
 
-#include "foundation/file_io.h"
+#include "base/handle.h"
 #include "lumora-local/sqlite_store.h"
 #include "lumora-local/ticket_maker.h"
 
@@ -25,11 +25,11 @@ extern char** environ;
 namespace pinwell::lumora::test {
 namespace {
 
-using foundation::Data;
-using foundation::Date;
-using foundation::FileDescriptor;
+using base::Data;
+using base::FileDescriptor;
 using pinwell::test::readFile;
 using pinwell::test::TemporaryDirectory;
+using values::Date;
 
 pid_t start(const std::vector<std::string>& arguments, const std::string& out, const std::string& err) {
     std::vector<std::string> words{LUMORA_LOCAL};
@@ -109,7 +109,7 @@ std::string RunningService::put(const CodeHash& hash, bool asAsset, bool revoked
     SignedRecord record{{recordName(hash), "made up", {hash}, revoked, asAsset, Date::now()}, {}};
     record.ticket = signer.makeTicket({record.record.hashes, revoked, record.record.signedAt});
     SqliteStore(directory_.storePath())
-        .put(Environment::production, {record}, {foundation::Date::now(), "tester", std::nullopt, "", false});
+        .put(Environment::production, {record}, {values::Date::now(), "tester", std::nullopt, "", false});
     return record.record.name;
 }
 

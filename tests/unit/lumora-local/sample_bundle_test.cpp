@@ -6,29 +6,30 @@
 #include <filesystem>
 #include <map>
 
-#include "foundation/bundle.h"
-#include "foundation/byte_reader.h"
-#include "foundation/bytes.h"
-#include "foundation/property_list.h"
-#include "foundation/value.h"
+#include "base/byte_io.h"
+#include "base/bytes.h"
+#include "base/text.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/sha256.h"
 #include "support/temporary_directory.h"
+#include "values/bundle.h"
+#include "values/property_list.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteReader;
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteReader;
+using base::ByteView;
+using base::Data;
 using pinwell::test::readFile;
 using pinwell::test::TemporaryDirectory;
 using pinwell::test::writeFile;
 
-const SealedComponents kComponents{foundation::toData("the property list"), foundation::toData("the seal")};
+const SealedComponents kComponents{base::toData("the property list"), base::toData("the seal")};
 
 Data reading(ByteReader reader, std::uint64_t length) {
-    return foundation::toData(reader.bytes(length, "bytes"));
+    return base::toData(reader.bytes(length, "bytes"));
 }
 
 /// The signature of a thin image, found through its load commands; it must end the image.
@@ -83,8 +84,8 @@ class SignedImage : public testing::TestWithParam<std::uint32_t> {
 
 TEST_P(SignedImage, HoldsACodeDirectoryRequirementsAndAnEmptySignature) {
     ASSERT_EQ(blobs_.size(), 3U);
-    EXPECT_EQ(foundation::toHex(blobs_[2]), "fade0c010000000c00000000");
-    EXPECT_EQ(foundation::toHex(blobs_[0x10000]), "fade0b0100000008");
+    EXPECT_EQ(base::toHex(blobs_[2]), "fade0c010000000c00000000");
+    EXPECT_EQ(base::toHex(blobs_[0x10000]), "fade0b0100000008");
 }
 
 TEST_P(SignedImage, MatchesItsCodeDirectory) {
@@ -103,7 +104,7 @@ TEST_P(SignedImage, MatchesItsCodeDirectory) {
     EXPECT_EQ(reader.u8("platform"), 0);
     EXPECT_EQ(reader.u8("page size"), 12);
     reader.seek(identifier, "identifier");
-    EXPECT_EQ(foundation::toString(reader.bytes(14, "identifier")), std::string("an.identifier\0", 14));
+    EXPECT_EQ(base::toString(reader.bytes(14, "identifier")), std::string("an.identifier\0", 14));
 
     // Special slots count down to the code hashes.
     ASSERT_EQ(special, 3U);
@@ -118,7 +119,7 @@ TEST_P(SignedImage, MatchesItsCodeDirectory) {
     ASSERT_EQ(std::size_t{limit}, image_.size() - signatureOf(image_).size());
     ASSERT_EQ(code, limit / 4096U);
     for (std::uint32_t page = 0; page < code; ++page) {
-        EXPECT_EQ(foundation::toData(reader.bytes(32, "page")),
+        EXPECT_EQ(base::toData(reader.bytes(32, "page")),
                   sha256(ByteView(image_).subspan(std::size_t{page} * 4096, 4096)));
     }
     EXPECT_TRUE(reader.atEnd());
@@ -152,18 +153,18 @@ TEST(SampleApplication, IsABundleWithAnExecutable) {
     const TemporaryDirectory directory;
     const std::string path = writeSampleApplication(directory.path());
     ASSERT_EQ(path, directory / "Sample.app");
-    const auto executable = foundation::mainExecutableOfBundle(path);
+    const auto executable = values::mainExecutableOfBundle(path);
     ASSERT_TRUE(executable);
     struct stat status {};
     ASSERT_EQ(::stat(executable->c_str(), &status), 0);
     EXPECT_NE(status.st_mode & 0111U, 0U);
-    EXPECT_TRUE(foundation::parsePropertyList(foundation::toData(readFile(path + "/Contents/Info.plist"))));
+    EXPECT_TRUE(values::parsePropertyList(base::toData(readFile(path + "/Contents/Info.plist"))));
 }
 
 TEST(SampleApplication, IsSignedOverItsOwnPropertyList) {
     const TemporaryDirectory directory;
     const std::string contents = writeSampleApplication(directory.path()) + "/Contents";
-    const Data universal = foundation::toData(readFile(contents + "/Programs/Sample"));
+    const Data universal = base::toData(readFile(contents + "/Programs/Sample"));
     ByteReader reader(universal);
     reader.seek(8 + 8, "first slice");
     const std::uint32_t offset = reader.be32("offset");
@@ -173,7 +174,7 @@ TEST(SampleApplication, IsSignedOverItsOwnPropertyList) {
     codeDirectory.seek(16, "hash offset");
     const std::uint32_t hashes = codeDirectory.be32("hash offset");
     codeDirectory.seek(hashes - 32U, "slot 1");
-    EXPECT_EQ(reading(codeDirectory, 32), sha256(foundation::toData(readFile(contents + "/Info.plist"))));
+    EXPECT_EQ(reading(codeDirectory, 32), sha256(base::toData(readFile(contents + "/Info.plist"))));
 }
 
 TEST(SampleApplication, OverwritesNothing) {

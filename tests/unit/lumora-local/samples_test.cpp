@@ -4,8 +4,8 @@
 
 #include <filesystem>
 
+#include "base/byte_io.h"
 #include "fixed_now.h"
-#include "foundation/byte_reader.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/sha256.h"
 #include "support/temporary_directory.h"
@@ -13,8 +13,8 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteReader;
-using foundation::Data;
+using base::ByteReader;
+using base::Data;
 using pinwell::test::readFile;
 using pinwell::test::TemporaryDirectory;
 using pinwell::test::writeFile;
@@ -25,8 +25,8 @@ TEST(Samples, AreOneOfEveryKindInADirectoryThatIsMade) {
     const std::string in = directory / "new/samples/";
     EXPECT_THAT(writeSamples(directory / "new/samples", kNow),
                 ElementsAre(in + "Sample.app", in + "Sample.dmg", in + "Unsigned.dmg", in + "Sample.pkg"));
-    EXPECT_EQ(foundation::toData(readFile(in + "Sample.dmg")), makeDiskImage(ImageSignature::adHoc));
-    EXPECT_EQ(foundation::toData(readFile(in + "Unsigned.dmg")), makeDiskImage(ImageSignature::none));
+    EXPECT_EQ(base::toData(readFile(in + "Sample.dmg")), makeDiskImage(ImageSignature::adHoc));
+    EXPECT_EQ(base::toData(readFile(in + "Unsigned.dmg")), makeDiskImage(ImageSignature::none));
 }
 
 TEST(Samples, AreNotWrittenWhenAnyOfThemExists) {
@@ -92,16 +92,16 @@ TEST(SampleDiskImage, IsSignedOverItsTrailerAndEveryPageOfItsData) {
     EXPECT_EQ(reader.be32("limit"), end);
     const auto digestAt = [&](std::size_t offset) {
         reader.seek(start + offset, "digest");
-        return foundation::toData(reader.bytes(32, "digest"));
+        return base::toData(reader.bytes(32, "digest"));
     };
-    EXPECT_EQ(digestAt(hashes), sha256(foundation::ByteView(plain).first(end)));
-    EXPECT_EQ(digestAt(hashes - 6U * 32U), sha256(foundation::ByteView(plain).subspan(end)));
+    EXPECT_EQ(digestAt(hashes), sha256(base::ByteView(plain).first(end)));
+    EXPECT_EQ(digestAt(hashes - 6U * 32U), sha256(base::ByteView(plain).subspan(end)));
 }
 
 TEST(SamplePackage, BeginsWithAnArchivesHeader) {
     const Data package = makePackage(kNow);
     ByteReader reader(package);
-    EXPECT_EQ(foundation::toString(foundation::toData(reader.bytes(4, "magic"))), "xar!");
+    EXPECT_EQ(base::toString(base::toData(reader.bytes(4, "magic"))), "xar!");
     EXPECT_EQ(reader.be16("size"), 28U);
     EXPECT_EQ(reader.be16("version"), 1U);
     EXPECT_LT(reader.be64("compressed length"), package.size());

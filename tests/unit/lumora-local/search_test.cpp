@@ -7,10 +7,10 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Data;
-using foundation::Date;
+using base::Data;
 using test::kProduction;
 using test::makeRecord;
+using values::Date;
 
 using Names = std::vector<std::string>;
 

@@ -7,22 +7,22 @@
 #include <set>
 #include <thread>
 
-#include "foundation/base64.h"
-#include "foundation/bytes.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
+#include "base/bytes.h"
+#include "base/text.h"
 #include "running_service.h"
 #include "support/file_properties.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Data;
-using foundation::Value;
+using base::Data;
 using pinwell::test::readFile;
 using test::kLookupPath;
 using test::RawClient;
 using test::RunningService;
+using values::Value;
 
 constexpr const char* kIdentifier = "X-Ostrel-Request-UUID";
 
@@ -38,7 +38,7 @@ std::string bodyFor(const std::vector<std::string>& names) {
 }
 
 Value parse(const std::string& text) {
-    auto value = foundation::parseJSON(foundation::asBytes(text));
+    auto value = values::parseJSON(base::asBytes(text));
     EXPECT_TRUE(value) << text;
     return value ? *std::move(value) : Value();
 }
@@ -56,10 +56,9 @@ TEST(Serve, AnswersALookupOverATrustedConnection) {
     EXPECT_EQ(result->status, 200);
     EXPECT_EQ(result->get_header_value("Content-Type"), "application/json");
     const Value answer = parse(result->body);
-    const auto ticket =
-        foundation::decodeBase64(*answer["records"][0]["fields"]["signedTicket"]["value"].string());
+    const auto ticket = base::decodeBase64(*answer["records"][0]["fields"]["signedTicket"]["value"].string());
     ASSERT_TRUE(ticket);
-    EXPECT_EQ(foundation::toString(*ticket).substr(0, 4), "s8ch");
+    EXPECT_EQ(base::toString(*ticket).substr(0, 4), "s8ch");
 }
 
 TEST(Serve, IsNotTrustedWithoutItsRoot) {

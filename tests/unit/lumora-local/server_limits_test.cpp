@@ -23,10 +23,10 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Date;
-using foundation::FileDescriptor;
+using base::FileDescriptor;
 using pinwell::test::TemporaryDirectory;
 using test::RawClient;
+using values::Date;
 
 constexpr std::chrono::milliseconds kSoon{50};
 constexpr const char* kHealth = "GET /healthz HTTP/1.1\r\nHost: localhost\r\n\r\n";
@@ -35,7 +35,7 @@ constexpr const char* kHealth = "GET /healthz HTTP/1.1\r\nHost: localhost\r\n\r\
 class BrokenRecords final : public RecordSource {
   public:
     std::optional<Delivery> findTicket(Environment, const std::string&) override { fail(); }
-    std::optional<foundation::Data> findAsset(const std::string&) override { fail(); }
+    std::optional<base::Data> findAsset(const std::string&) override { fail(); }
     std::size_t countRecords() override { fail(); }
 
   private:

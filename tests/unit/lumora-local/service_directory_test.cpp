@@ -15,10 +15,10 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Date;
 using pinwell::test::readFile;
 using pinwell::test::TemporaryDirectory;
 using pinwell::test::writeFile;
+using values::Date;
 
 unsigned modeOf(const std::string& path) {
     struct stat status {};
@@ -141,7 +141,7 @@ TEST_F(ServiceDirectoryTest, CanBeOpenedAndUsed) {
     EXPECT_EQ(directory.hosts(), (std::vector<std::string>{"localhost", "127.0.0.1"}));
     EXPECT_EQ(SqliteStore(directory.storePath()).countRecords(), 0U);
     const TicketSigner signer(directory.signerKeyPath(), directory.signerChainPaths());
-    EXPECT_FALSE(signer.makeTicket({{{2, foundation::Data(20)}}, false, Date{1}}).empty());
+    EXPECT_FALSE(signer.makeTicket({{{2, base::Data(20)}}, false, Date{1}}).empty());
 }
 
 TEST_F(ServiceDirectoryTest, IsNotOpenedIfThereIsNoService) {

@@ -2,14 +2,14 @@
 
 #include <gtest/gtest.h>
 
-#include "foundation/json.h"
 #include "lumora-local/failure.h"
+#include "values/json.h"
 
 namespace pinwell::lumora {
 namespace {
 
 ServiceSettings parseText(std::string_view text) {
-    const auto document = foundation::parseJSON(foundation::asBytes(text));
+    const auto document = values::parseJSON(base::asBytes(text));
     if (!document) throw std::runtime_error("no JSON");
     return parseServiceSettings(*document, "/site/service/service.json");
 }

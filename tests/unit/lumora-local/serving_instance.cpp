@@ -11,18 +11,18 @@
 #include <set>
 #include <stdexcept>
 
-#include "foundation/base64.h"
-#include "foundation/file_io.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
+#include "base/handle.h"
+#include "base/text.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/sha256.h"
 #include "running_service.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::lumora::test {
 namespace {
 
-using foundation::Data;
+using base::Data;
 using pinwell::test::Command;
 using std::chrono::milliseconds;
 using std::chrono::steady_clock;
@@ -38,21 +38,21 @@ Command lumora(std::vector<std::string> arguments) {
 }
 
 SignedRecord stateOf(const std::string& name, int state) {
-    Data hash = foundation::toData(name);
+    Data hash = base::toData(name);
     hash.resize(20);
-    return {{name, "made up", {{2, hash}}, state % 3 == 0, false, foundation::Date{state}},
-            foundation::toData(std::to_string(state))};
+    return {{name, "made up", {{2, hash}}, state % 3 == 0, false, values::Date{state}},
+            base::toData(std::to_string(state))};
 }
 
 /// The state in a response; 0 if there is no such record, -1 if the response is unreadable.
 int stateIn(const std::string& body) {
-    const auto document = foundation::parseJSON(foundation::asBytes(body));
+    const auto document = values::parseJSON(base::asBytes(body));
     if (!document) return -1;
-    const foundation::Value& record = (*document)["records"][0];
+    const values::Value& record = (*document)["records"][0];
     if (record["serverErrorCode"].string() != nullptr) return 0;
     const std::string* encoded = record["fields"]["signedTicket"]["value"].string();
-    const auto ticket = encoded != nullptr ? foundation::decodeBase64(*encoded) : std::nullopt;
-    return ticket ? std::atoi(foundation::toString(*ticket).c_str()) : -1;
+    const auto ticket = encoded != nullptr ? base::decodeBase64(*encoded) : std::nullopt;
+    return ticket ? std::atoi(base::toString(*ticket).c_str()) : -1;
 }
 
 }  // namespace
@@ -81,7 +81,7 @@ void ServingInstance::kill() {
 }
 
 int freePort() {
-    const foundation::FileDescriptor socket(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    const base::FileDescriptor socket(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
     sockaddr_in address{};
     address.sin_family = AF_INET;
     address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
@@ -132,7 +132,7 @@ void Load::stop() {
 }
 
 void Load::write(std::size_t writer) {
-    const Occasion occasion{foundation::Date{100}, "load", Reason::superseded, "", true};
+    const Occasion occasion{values::Date{100}, "load", Reason::superseded, "", true};
     for (int state = 1; !stopping_; ++state) {
         for (std::size_t i = 0; i < kRecordsOfAWriter && !stopping_; ++i) {
             Subject& subject = *subjects_[writer * kRecordsOfAWriter + i];
@@ -207,12 +207,12 @@ std::vector<std::string> Load::lost(RecordStore& store) const {
     for (const auto& subject : subjects_) {
         for (const int state : subject->all) {
             const Data ticket = stateOf(subject->name, state).ticket;
-            if (!logged.contains({subject->name, foundation::toHex(sha256(ticket))})) {
+            if (!logged.contains({subject->name, base::toHex(sha256(ticket))})) {
                 lost.push_back(subject->name + ", put " + std::to_string(state) + ": not in the log");
             }
         }
         const auto delivery = store.findTicket(Environment::production, subject->name);
-        const int last = delivery ? std::atoi(foundation::toString(*delivery->inlineTicket).c_str()) : 0;
+        const int last = delivery ? std::atoi(base::toString(*delivery->inlineTicket).c_str()) : 0;
         if (last < subject->acknowledged) lost.push_back(subject->name + ": an older ticket");
     }
     return lost;

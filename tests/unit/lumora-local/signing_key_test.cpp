@@ -12,8 +12,8 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteView;
-using foundation::Data;
+using base::ByteView;
+using base::Data;
 using std::chrono::milliseconds;
 
 /// Signs by returning the digest, after something that the test chooses has happened.
@@ -21,10 +21,10 @@ class FakeToken final : public DigestSigner {
   public:
     explicit FakeToken(void (*mishap)(const Data& digest)) : mishap_(mishap) {}
 
-    Data publicKey() const override { return foundation::toData("public"); }
+    Data publicKey() const override { return base::toData("public"); }
     Data signDigest(ByteView digest) const override {
-        mishap_(foundation::toData(digest));
-        return foundation::toData(digest);
+        mishap_(base::toData(digest));
+        return base::toData(digest);
     }
 
   private:
@@ -39,7 +39,7 @@ std::unique_ptr<SigningKey> keyWith(void (*mishap)(const Data& digest),
 /// The text of the failure of sign().
 std::string failureOf(const SigningKey& key, std::string_view message = "message") {
     try {
-        key.sign(foundation::asBytes(message));
+        key.sign(base::asBytes(message));
     } catch (const Failure& failure) {
         EXPECT_EQ(failure.exitStatus(), EX_IOERR);
         return failure.what();
@@ -51,9 +51,9 @@ constexpr const char* kGone = "the process that speaks to the token has ended, o
 
 TEST(SigningProcess, SignsTheDigestOfEachMessage) {
     const auto key = keyWith([](const Data&) {});
-    EXPECT_EQ(key->publicKey(), foundation::toData("public"));
+    EXPECT_EQ(key->publicKey(), base::toData("public"));
     for (const char* message : {"one", "two"})
-        EXPECT_EQ(key->sign(foundation::asBytes(message)), sha256(foundation::asBytes(message)));
+        EXPECT_EQ(key->sign(base::asBytes(message)), sha256(base::asBytes(message)));
 }
 
 TEST(SigningProcess, PassesOnTheTokensError) {

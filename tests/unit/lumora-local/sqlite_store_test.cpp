@@ -14,13 +14,13 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Data;
-using foundation::Date;
+using base::Data;
 using pinwell::test::TemporaryDirectory;
 using pinwell::test::writeFile;
 using test::kOccasion;
 using test::kProduction;
 using test::makeRecord;
+using values::Date;
 
 class SqliteStoreTest : public testing::Test {
   protected:

@@ -13,8 +13,8 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Date;
 using pinwell::test::TemporaryDirectory;
+using values::Date;
 
 /// A store as version 1 of the schema has it: records, and no events.
 class SqliteUpgradeTest : public testing::Test {

@@ -12,17 +12,17 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::Data;
-using foundation::Date;
+using base::Data;
 using test::kProduction;
+using values::Date;
 
 constexpr int kMoreCallsThanAChangeMakes = 5000;
 
 SignedRecord statedRecord(const std::string& name, bool revoked) {
-    Data hash = foundation::toData(name);  // different for each record: none gets around a revoked one
+    Data hash = base::toData(name);  // different for each record: none gets around a revoked one
     hash.resize(20);
     return {{name, "Sample.app", {{2, hash}}, revoked, false, Date{7}},
-            foundation::toData(revoked ? "revoked" : "valid")};
+            base::toData(revoked ? "revoked" : "valid")};
 }
 
 class StoreCrashTest : public testing::TestWithParam<std::string> {

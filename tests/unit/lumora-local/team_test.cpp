@@ -5,12 +5,12 @@
 #include <filesystem>
 #include <memory>
 
-#include "foundation/base64.h"
-#include "foundation/format.h"
+#include "base/text.h"
 #include "lumora-local/event.h"
 #include "postgres_cluster.h"
 #include "running_service.h"
 #include "serving_instance.h"
+#include "values/format.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -85,13 +85,13 @@ TEST_F(Team, SeesEachRevocationThroughEveryInstanceOnceItIsAcknowledged) {
     const std::string one = R"({"recordName":")" + names[0] + R"("})";
     const std::string both = one + R"(,{"recordName":")" + names[1] + R"("})";
     PostgresStore store(place_);
-    const Occasion occasion{foundation::Date{100}, "tester", std::nullopt, "", true};
+    const Occasion occasion{values::Date{100}, "tester", std::nullopt, "", true};
     for (int state = 1; state <= 40; ++state) {
         const std::string ticket = "ticket " + std::to_string(state);
         std::vector<SignedRecord> records;
         for (const std::string& name : names) {
-            records.push_back({{name, "made up", {}, state % 2 == 0, false, foundation::Date{state}},
-                               foundation::toData(ticket)});
+            records.push_back(
+                {{name, "made up", {}, state % 2 == 0, false, values::Date{state}}, base::toData(ticket)});
         }
         store.put(Environment::production, records, occasion);
         for (const auto& client : clients) {
@@ -100,8 +100,7 @@ TEST_F(Team, SeesEachRevocationThroughEveryInstanceOnceItIsAcknowledged) {
                     client->Post(test::kLookupPath, R"({"records":[)" + asked + "]}", "application/json");
                 ASSERT_TRUE(answer);
                 ASSERT_EQ(answer->status, 200);
-                EXPECT_NE(answer->body.find(foundation::encodeBase64(foundation::toData(ticket))),
-                          std::string::npos)
+                EXPECT_NE(answer->body.find(base::encodeBase64(base::toData(ticket))), std::string::npos)
                     << answer->body << " is older than " << ticket;
             }
         }

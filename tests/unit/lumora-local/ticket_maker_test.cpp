@@ -4,8 +4,8 @@
 
 #include <algorithm>
 
+#include "base/byte_io.h"
 #include "certificates.h"
-#include "foundation/byte_reader.h"
 #include "lumora-local/authority.h"
 #include "lumora-local/failure.h"
 #include "support/temporary_directory.h"
@@ -13,12 +13,12 @@
 namespace pinwell::lumora {
 namespace {
 
-using foundation::ByteReader;
-using foundation::ByteView;
-using foundation::Data;
-using foundation::Date;
+using base::ByteReader;
+using base::ByteView;
+using base::Data;
 using pinwell::test::TemporaryDirectory;
 using pinwell::test::writeFile;
+using values::Date;
 
 CodeHash shortHash(std::uint32_t algorithm, int fill) {
     return {algorithm, Data(20, static_cast<std::byte>(fill))};
@@ -40,16 +40,16 @@ TEST(TicketPayload, ListsItsHashesWithTheirDigestTypes) {
     const Data payload =
         encodeTicketPayload({{shortHash(2, 0xA1), shortHash(1, 0xB2)}, false, Date{0x65432100}});
     ByteReader reader(payload);
-    EXPECT_EQ(foundation::toString(reader.bytes(4, "magic")), "m8tk");
+    EXPECT_EQ(base::toString(reader.bytes(4, "magic")), "m8tk");
     EXPECT_EQ(reader.le16("version"), 2);
     EXPECT_EQ(reader.le16("hash length"), 20);
     EXPECT_EQ(reader.le32("count"), 2U);
     EXPECT_EQ(reader.le32("flags"), 0U);
     EXPECT_EQ(reader.le64("time"), 0x65432100U);
     EXPECT_EQ(reader.u8("algorithm"), 2);
-    EXPECT_EQ(foundation::toData(reader.bytes(20, "hash")), shortHash(2, 0xA1).hash);
+    EXPECT_EQ(base::toData(reader.bytes(20, "hash")), shortHash(2, 0xA1).hash);
     EXPECT_EQ(reader.u8("algorithm"), 1);
-    EXPECT_EQ(foundation::toData(reader.bytes(20, "hash")), shortHash(1, 0xB2).hash);
+    EXPECT_EQ(base::toData(reader.bytes(20, "hash")), shortHash(1, 0xB2).hash);
     EXPECT_TRUE(reader.atEnd());
 }
 
@@ -60,10 +60,10 @@ TEST(TicketPayload, PadsShortHashesBesideLongOnes) {
     EXPECT_EQ(reader.le16("hash length"), 48);
     reader.seek(24, "entries");
     EXPECT_EQ(reader.u8("algorithm"), 2);
-    EXPECT_EQ(foundation::toData(reader.bytes(20, "hash")), shortHash(2, 0xA1).hash);
-    EXPECT_EQ(foundation::toData(reader.bytes(28, "padding")), Data(28));
+    EXPECT_EQ(base::toData(reader.bytes(20, "hash")), shortHash(2, 0xA1).hash);
+    EXPECT_EQ(base::toData(reader.bytes(28, "padding")), Data(28));
     EXPECT_EQ(reader.u8("algorithm"), 4);
-    EXPECT_EQ(foundation::toData(reader.bytes(48, "hash")), longHash(0xC3).hash);
+    EXPECT_EQ(base::toData(reader.bytes(48, "hash")), longHash(0xC3).hash);
     EXPECT_TRUE(reader.atEnd());
 }
 
@@ -80,7 +80,7 @@ TEST(TicketPayload, IsOfTheFirstVersionForAHashOfUnknownDigestType) {
     reader.skip(4, "magic");
     EXPECT_EQ(reader.le16("version"), 1);
     reader.seek(24, "entries");
-    EXPECT_EQ(foundation::toData(reader.bytes(20, "hash")), shortHash(0, 0xA1).hash);
+    EXPECT_EQ(base::toData(reader.bytes(20, "hash")), shortHash(0, 0xA1).hash);
     EXPECT_TRUE(reader.atEnd());
 }
 
@@ -130,16 +130,16 @@ struct Container {
 
 Container takeApart(const Data& ticket) {
     ByteReader reader(ticket);
-    EXPECT_EQ(foundation::toString(reader.bytes(4, "magic")), "s8ch");
+    EXPECT_EQ(base::toString(reader.bytes(4, "magic")), "s8ch");
     EXPECT_EQ(reader.le16("version"), 1);
     EXPECT_EQ(reader.le16("reserved"), 0);
     const std::uint32_t certificatesLength = reader.le32("certificates");
     const std::uint32_t payloadLength = reader.le32("payload");
     Container parts;
-    parts.certificates = foundation::toData(reader.bytes(certificatesLength, "certificates"));
-    parts.payload = foundation::toData(reader.bytes(payloadLength, "payload"));
+    parts.certificates = base::toData(reader.bytes(certificatesLength, "certificates"));
+    parts.payload = base::toData(reader.bytes(payloadLength, "payload"));
     parts.signedData = Data(ticket.begin(), ticket.begin() + static_cast<std::ptrdiff_t>(reader.position()));
-    parts.signature = foundation::toData(reader.bytes(72, "signature"));
+    parts.signature = base::toData(reader.bytes(72, "signature"));
     EXPECT_TRUE(reader.atEnd());
     return parts;
 }

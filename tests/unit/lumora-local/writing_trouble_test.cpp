@@ -90,7 +90,7 @@ TEST(Samples, AreWrittenThroughInterruptions) {
 
 TEST(NewFile, IsRemovedIfTheWriteFails) {
     const auto write = [](const std::string& directory) {
-        writeNewFile(directory + "/file", foundation::toData("contents"), 0600);
+        writeNewFile(directory + "/file", base::toData("contents"), 0600);
     };
     EXPECT_THAT(
         failEachCall([](std::size_t number) { return Trouble::fromCallOn(number, ENOSPC); }, write, {"file"}),
@@ -100,14 +100,14 @@ TEST(NewFile, IsRemovedIfTheWriteFails) {
 TEST(NewFile, KeepsAnExistingFile) {
     const TemporaryDirectory directory;
     pinwell::test::writeFile(directory / "file", "mine");
-    EXPECT_THROW(writeNewFile(directory / "file", foundation::toData("contents"), 0600), Failure);
+    EXPECT_THROW(writeNewFile(directory / "file", base::toData("contents"), 0600), Failure);
     EXPECT_EQ(pinwell::test::readFile(directory / "file"), "mine");
 }
 
 TEST(PendingDirectory, IsRemovedIfItCannotBePublished) {
     const auto write = [](const std::string& directory) {
         PendingDirectory pending(directory + "/new", 0700);
-        writeNewFile(pending.path() + "/file", foundation::toData("contents"), 0600);
+        writeNewFile(pending.path() + "/file", base::toData("contents"), 0600);
         pending.publish();
     };
     EXPECT_THAT(failEachCall([](std::size_t number) { return Trouble::atCall(number, EIO); }, write, {"new"}),

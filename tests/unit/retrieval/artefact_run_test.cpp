@@ -7,7 +7,7 @@
 #include <cerrno>
 #include <filesystem>
 
-#include "foundation/base64.h"
+#include "base/text.h"
 #include "src/DownloadDelegate.h"
 #include "support/hash_by_executable.h"
 #include "support/test_platform.h"
@@ -45,25 +45,24 @@ class Artefacts : public testing::Test {
     std::string stapled() const {
         return std::filesystem::exists(carrier) ? readFile(carrier) : std::string("none");
     }
-    void staple(const foundation::Data& bytes) const { writeFile(carrier, foundation::ByteView(bytes)); }
+    void staple(const base::Data& bytes) const { writeFile(carrier, base::ByteView(bytes)); }
     /// A response of the record service.
     static Answer answered(const std::string& record) {
         Answer answer;
         answer.kind = Answer::Kind::answered;
         answer.response =
-            https::HTTPResponse{*foundation::URL::fromString("https://api.lumora.example/"), 200, {}};
-        answer.body = foundation::toData(R"({"records":[)" + record + "]}");
+            https::HTTPResponse{*values::URL::fromString("https://api.lumora.example/"), 200, {}};
+        answer.body = base::toData(R"({"records":[)" + record + "]}");
         return answer;
     }
-    static Answer answered(const foundation::Data& bytes) {
-        return answered(R"({"fields":{"signedTicket":{"value":")" + foundation::encodeBase64(bytes) +
-                        R"("}}})");
+    static Answer answered(const base::Data& bytes) {
+        return answered(R"({"fields":{"signedTicket":{"value":")" + base::encodeBase64(bytes) + R"("}}})");
     }
     static Answer notIssued() { return answered(R"({"reason":"Record not found"})"); }
     static Answer failed(Answer::Kind kind) {
         Answer answer;
         answer.kind = kind;
-        answer.error = foundation::Error(foundation::kURLErrorDomain, 4, "no connection");
+        answer.error = base::Error(base::kURLErrorDomain, 4, "no connection");
         return answer;
     }
 
@@ -73,7 +72,7 @@ class Artefacts : public testing::Test {
     const std::string path = platform.directory / "App.app";
     const std::string executable = path + "/Contents/MacOS/App";
     const std::string carrier = path + "/Contents/CodeResources";
-    const foundation::Data ticket = unsignedTicket({foundation::toData("first...............")});
+    const base::Data ticket = unsignedTicket({base::toData("first...............")});
 };
 
 // Staples.
@@ -84,7 +83,7 @@ TEST_F(Artefacts, AStapleLooksUpARecordAndWritesItsTicket) {
     EXPECT_EQ(run.recordName(), "2/2/66697273742e2e2e2e2e2e2e2e2e2e2e2e2e2e2e");
     EXPECT_EQ(run.kind(), Kind::bundle);
     EXPECT_THAT(run.end(answered(ticket)), Ended(0, Cause::worked));
-    EXPECT_EQ(stapled(), foundation::toString(ticket));
+    EXPECT_EQ(stapled(), base::toString(ticket));
     EXPECT_EQ(run.messages().back(), "The staple and validate action worked!");
 }
 
@@ -98,8 +97,8 @@ TEST_F(Artefacts, AStapleEndsAccordingToItsResponse) {
         {failed(Answer::Kind::unreachable), 68, Cause::unreachable},
         {failed(Answer::Kind::untrusted), 68, Cause::untrusted},
         {notIssued(), 65, Cause::notIssued},
-        {answered(foundation::toData("no ticket")), 65, Cause::notAcceptable},
-        {answered(unsignedTicket({foundation::Data(20, std::byte{1})})), 65, Cause::notAcceptable},
+        {answered(base::toData("no ticket")), 65, Cause::notAcceptable},
+        {answered(unsignedTicket({base::Data(20, std::byte{1})})), 65, Cause::notAcceptable},
     };
     for (const Row& row : rows) {
         ArtefactRun run = made(kOperationStaple);
@@ -128,7 +127,7 @@ TEST_F(Artefacts, AnAssetIsWrittenAsATicketIs) {
         std::to_string(ticket.size()) + "}}}}");
     answer.asset = Answer::Asset{*answer.response, ticket};
     EXPECT_THAT(run.end(answer), Ended(0, Cause::worked));
-    EXPECT_EQ(stapled(), foundation::toString(ticket));
+    EXPECT_EQ(stapled(), base::toString(ticket));
 }
 
 TEST_F(Artefacts, ARunThatWasReleasedReadsAgain) {
@@ -146,7 +145,7 @@ TEST_F(Artefacts, AnArtefactWithAnotherHashByThenIsLookedUpAgain) {
     EXPECT_EQ(run.end(answered(ticket)), std::nullopt);
     EXPECT_THAT(run.recordName(), StartsWith("2/2/7365636f6e64"));
     EXPECT_EQ(stapled(), "none");
-    EXPECT_THAT(run.end(answered(unsignedTicket({foundation::toData("second..............")}))),
+    EXPECT_THAT(run.end(answered(unsignedTicket({base::toData("second..............")}))),
                 Ended(0, Cause::worked));
 }
 
@@ -178,7 +177,7 @@ TEST_F(Artefacts, ATextWithAZeroByteIsNoPath) {
 
 TEST_F(Artefacts, AValidationWithoutATicketNeedsNoLookup) {
     EXPECT_THAT(made(kOperationValidate).begin(), Ended(65, Cause::notStapled));
-    staple(foundation::toData("no ticket"));
+    staple(base::toData("no ticket"));
     EXPECT_THAT(made(kOperationValidate).begin(), Ended(65, Cause::notAcceptable));
 }
 
@@ -190,7 +189,7 @@ TEST_F(Artefacts, AValidationGoesByTheServicesTicketToo) {
     constexpr std::uint32_t kRevoked = 1;
     ASSERT_EQ(run.begin(), std::nullopt);
     EXPECT_THAT(run.end(answered(unsignedTicket({}, kRevoked))), Ended(77, Cause::revoked));
-    EXPECT_EQ(stapled(), foundation::toString(ticket));
+    EXPECT_EQ(stapled(), base::toString(ticket));
 }
 
 // Tickets that exist already.
@@ -203,14 +202,14 @@ TEST_F(Artefacts, AttachingTakesTheTicketOfTheRecord) {
     }),
                 AllOf(Field(&Outcome::exitStatus, 0), Field(&Outcome::cause, Cause::worked)));
     EXPECT_EQ(asked, "2/2/66697273742e2e2e2e2e2e2e2e2e2e2e2e2e2e2e");
-    EXPECT_EQ(stapled(), foundation::toString(ticket));
+    EXPECT_EQ(stapled(), base::toString(ticket));
 }
 
 TEST_F(Artefacts, AttachingDistinguishesAMissingTicketFromAnUnreadableOne) {
     const auto causeAfter = [&](int code) {
         return made(kOperationStaple)
-            .attach([code](const std::string& name) -> foundation::Result<foundation::Data> {
-                return foundation::Error::posix(code, name);
+            .attach([code](const std::string& name) -> base::Result<base::Data> {
+                return base::Error::posix(code, name);
             })
             .cause;
     };

@@ -49,7 +49,7 @@ testing::Matcher<const Answer&> HasKind(Answer::Kind kind) {
 testing::Matcher<const Answer&> Tells(const std::string& name) {
     return AllOf(HasKind(Answer::Kind::answered),
                  testing::ResultOf(
-                     "body", [](const Answer& answer) { return foundation::toString(answer.body); },
+                     "body", [](const Answer& answer) { return base::toString(answer.body); },
                      R"({"records":[)" + recordOf(name) + "]}"));
 }
 
@@ -222,7 +222,7 @@ TEST_F(Lookup, AResponseWithoutABodyIsNone) {
 }
 
 TEST_F(Lookup, WithoutASessionIsUnreachable) {
-    sessions.failWith({foundation::kURLErrorDomain,
+    sessions.failWith({base::kURLErrorDomain,
                        static_cast<std::int64_t>(https::URLErrorCode::resourceUnavailable), "no threads"});
     EXPECT_THAT(lookUp(namesUpTo(3)), AllOf(SizeIs(3), Each(HasKind(Answer::Kind::unreachable))));
 }
@@ -273,7 +273,7 @@ TEST_F(LookupOfAnAsset, FetchesItWithItsRecord) {
     const Answer answer = lookUp({"2/2/a"}).at(0);
     EXPECT_THAT(answer, HasKind(Answer::Kind::answered));
     ASSERT_TRUE(answer.asset);
-    EXPECT_EQ(foundation::toString(answer.asset->contents), "abc");
+    EXPECT_EQ(base::toString(answer.asset->contents), "abc");
     EXPECT_EQ(sessions.requests().at(1).url->host(), "a.example");
 }
 

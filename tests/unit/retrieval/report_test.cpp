@@ -6,8 +6,8 @@
 
 #include <set>
 
-#include "foundation/json.h"
-#include "foundation/value.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::test {
 namespace {
@@ -92,7 +92,7 @@ TEST(ReportAsJson, IsOneLineWhateverThePathHolds) {
     report.path = "a\n\"\\\xff\x01";
     const std::string line = asJson(report);
     EXPECT_THAT(line, Not(HasSubstr("\n")));
-    const auto document = foundation::parseJSON(foundation::asBytes(line));
+    const auto document = values::parseJSON(base::asBytes(line));
     ASSERT_TRUE(document);
     EXPECT_EQ(*(*document)["path"].string(), "a\n\"\\\xef\xbf\xbd\x01");
 }

@@ -11,9 +11,9 @@ using retrieval::hashInRecordName;
 const std::string kTwenty(40, 'a');
 
 TEST(RecordName, HoldsAHash) {
-    EXPECT_EQ(hashInRecordName("2/2/" + kTwenty), foundation::Data(20, std::byte{0xAA}));
-    EXPECT_EQ(hashInRecordName("1/" + kTwenty), foundation::Data(20, std::byte{0xAA}));
-    EXPECT_EQ(hashInRecordName("2/4/" + std::string(96, '0')), foundation::Data(48));
+    EXPECT_EQ(hashInRecordName("2/2/" + kTwenty), base::Data(20, std::byte{0xAA}));
+    EXPECT_EQ(hashInRecordName("1/" + kTwenty), base::Data(20, std::byte{0xAA}));
+    EXPECT_EQ(hashInRecordName("2/4/" + std::string(96, '0')), base::Data(48));
     EXPECT_TRUE(hashInRecordName("2/4294967295/" + kTwenty));
     EXPECT_TRUE(hashInRecordName("2/1/" + std::string(128, '9')));
 }

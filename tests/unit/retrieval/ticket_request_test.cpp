@@ -7,17 +7,16 @@
 #include <set>
 #include <thread>
 
-#include "foundation/base64.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
+#include "base/text.h"
 #include "support/answering_sessions.h"
 #include "support/test_platform.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::Data;
-using foundation::Value;
+using base::Data;
 using retrieval::Cancellation;
 using retrieval::Cause;
 using retrieval::Clock;
@@ -30,6 +29,7 @@ using testing::HasSubstr;
 using testing::IsEmpty;
 using testing::Not;
 using testing::SizeIs;
+using values::Value;
 
 using Reply = AnsweringSessions::Reply;
 
@@ -49,7 +49,7 @@ class Request : public testing::Test {
     Request() { retry = {.retries = 3, .firstDelay = std::chrono::duration<double>(0)}; }
 
     static TicketWish wishFor(unsigned value) { return {.hashes = {{2, hashOf(value)}}, .label = "App"}; }
-    static std::string nameOf(unsigned value) { return "2/2/" + foundation::toHex(hashOf(value)); }
+    static std::string nameOf(unsigned value) { return "2/2/" + base::toHex(hashOf(value)); }
 
     /// The members of a valid response, each changeable by name.
     static std::map<std::string, std::string> issued(unsigned value, const Data& ticket) {
@@ -57,7 +57,7 @@ class Request : public testing::Test {
                 {"label", quoted("App")},
                 {"environment", quoted("production")},
                 {"action", quoted("issued")},
-                {"ticket", quoted(foundation::encodeBase64(ticket))},
+                {"ticket", quoted(base::encodeBase64(ticket))},
                 {"event", quoted(kEvent)}};
     }
     static Reply replyOf(const std::map<std::string, std::string>& members, int status = 201) {
@@ -110,9 +110,9 @@ TEST_F(Request, HasTheTicketsHashesAndItsLabel) {
     EXPECT_EQ(sent.method, "POST");
     EXPECT_EQ(sent.url->absoluteString(), "https://service.example:8444/v1/tickets");
     EXPECT_EQ(sent.headers.find("Content-Type")->second, "application/json");
-    EXPECT_EQ(foundation::toString(sent.body),
-              R"({"hashes":[")" + nameOf(1) + R"(","2/4/)" + foundation::toHex(Data(48, std::byte{2})) +
-                  R"("],"label":"My \"App\"","record":")" + nameOf(1) + "\"}");
+    EXPECT_EQ(base::toString(sent.body), R"({"hashes":[")" + nameOf(1) + R"(","2/4/)" +
+                                             base::toHex(Data(48, std::byte{2})) +
+                                             R"("],"label":"My \"App\"","record":")" + nameOf(1) + "\"}");
 }
 
 TEST_F(Request, ReinstatesWithACommentOnlyOnRequest) {
@@ -120,15 +120,15 @@ TEST_F(Request, ReinstatesWithACommentOnlyOnRequest) {
     wish.reinstates = true;
     wish.comment = "built anew";
     request(wish);
-    const auto body = foundation::parseJSON(sessions.requests().at(0).body);
+    const auto body = values::parseJSON(sessions.requests().at(0).body);
     EXPECT_TRUE((*body)["reinstate"].boolValue());
     EXPECT_EQ(*(*body)["comment"].string(), "built anew");
 }
 
 TEST_F(Request, OfAHashOfUnknownTypeNamesItsRecord) {
     request({.hashes = {{0, hashOf(1)}}, .label = "App"});
-    EXPECT_THAT(foundation::toString(sessions.requests().at(0).body),
-                HasSubstr(R"("record":"1/)" + foundation::toHex(hashOf(1))));
+    EXPECT_THAT(base::toString(sessions.requests().at(0).body),
+                HasSubstr(R"("record":"1/)" + base::toHex(hashOf(1))));
 }
 
 TEST_F(Request, ThatCannotBeWrittenIsNotSent) {
@@ -346,8 +346,8 @@ TEST_F(Request, IsRepeatedAfterALostConnection) {
         int tries = 0;
         sessions.answerBy([&](const https::Request&) {
             if (++tries < 3)
-                return Reply{.error = foundation::Error(foundation::kURLErrorDomain,
-                                                        static_cast<std::int64_t>(code), "lost")};
+                return Reply{.error =
+                                 base::Error(base::kURLErrorDomain, static_cast<std::int64_t>(code), "lost")};
             return replyOf(issued(1, unsignedTicket({hashOf(1)})));
         });
         EXPECT_EQ(request(wishFor(1)).fetched.attempts, 3U);
@@ -364,8 +364,7 @@ TEST_F(Request, IsNotRepeatedAfterAFinalFailure) {
     std::size_t sent = 0;
     for (const Code code : {Code::tooManyRedirects, Code::tooLarge, Code::badServerResponse,
                             Code::secureConnectionFailed, Code::unsupportedURL}) {
-        answer(
-            {.error = foundation::Error(foundation::kURLErrorDomain, static_cast<std::int64_t>(code), "x")});
+        answer({.error = base::Error(base::kURLErrorDomain, static_cast<std::int64_t>(code), "x")});
         EXPECT_EQ(request(wishFor(1)).fetched.exitStatus, 68);
         EXPECT_THAT(sessions.requests(), SizeIs(++sent));
     }
@@ -384,8 +383,8 @@ TEST_F(Request, ToAStrangerIsNotRepeated) {
 }
 
 TEST_F(Request, AfterAServiceThatWasNotReachedIsNotMade) {
-    answer({.error = foundation::Error(foundation::kURLErrorDomain,
-                                       static_cast<std::int64_t>(https::URLErrorCode::cannotConnect), "x")});
+    answer({.error = base::Error(base::kURLErrorDomain,
+                                 static_cast<std::int64_t>(https::URLErrorCode::cannotConnect), "x")});
     TicketRequests all = requests();
     EXPECT_EQ(all.request(wishFor(1)).fetched.attempts, 4U);
     const RequestedTicket second = all.request(wishFor(2));
@@ -401,9 +400,9 @@ TEST_F(Request, AfterAServiceThatCameBackIsMade) {
     int tries = 0;
     sessions.answerBy([&](const https::Request&) {
         if (++tries < 3)
-            return Reply{.error = foundation::Error(
-                             foundation::kURLErrorDomain,
-                             static_cast<std::int64_t>(https::URLErrorCode::connectionLost), "x")};
+            return Reply{.error = base::Error(base::kURLErrorDomain,
+                                              static_cast<std::int64_t>(https::URLErrorCode::connectionLost),
+                                              "x")};
         return problem(403, "no");
     });
     TicketRequests all = requests();

@@ -20,9 +20,9 @@
 #include <iterator>
 #include <thread>
 
+#include "base/handle.h"
 #include "confined_child.h"
-#include "foundation/file_io.h"
-#include "foundation/sanitized.h"
+#include "runtime/process.h"
 #include "support/file_properties.h"
 #include "support/temporary_directory.h"
 
@@ -137,7 +137,7 @@ TEST_F(ConfinedFiles, StayOpenWhenTheyWereOpenBefore) {
     close(before);
 }
 
-using foundation::kSanitized;  // its own tools start programs, trace, fork and read memory
+using runtime::kSanitized;  // its own tools start programs, trace, fork and read memory
 
 /// A forbidden call. Its arguments do no harm if it is allowed.
 struct ForbiddenCall {
@@ -340,7 +340,7 @@ class OpenSocket {
         return reasonOf(call(socket_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address));
     }
 
-    foundation::FileDescriptor socket_{socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0)};
+    base::FileDescriptor socket_{socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0)};
 };
 
 TEST_F(ConfinedService, UsesTcpAsItWasGiven) {

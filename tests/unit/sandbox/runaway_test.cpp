@@ -16,9 +16,8 @@
 #include <thread>
 
 #include "child_process.h"
-#include "foundation/sanitized.h"
-#include "foundation/signal_deferral.h"
-#include "foundation/stack_guard.h"
+#include "runtime/process.h"
+#include "runtime/signals.h"
 
 namespace pinwell::test {
 namespace {
@@ -68,7 +67,7 @@ TEST(Runaway, ThatUsesUpItsProcessorTimeEndsWithOneLine) {
 
 TEST(Runaway, EndsWhenTheWriteThatItIsInHasEnded) {
     const ChildEnd end = endOf([](int output) {
-        const foundation::SignalDeferral writing;
+        const runtime::SignalDeferral writing;
         raise(SIGXCPU);
         [[maybe_unused]] const ssize_t written = write(output, "written\n", 8);
     });
@@ -86,9 +85,9 @@ TEST(Runaway, PrintsNothingIfItMayNot) {
 }
 
 TEST(Runaway, ThatUsesUpItsStackEndsWithOneLine) {
-    if (foundation::kSanitized) GTEST_SKIP() << "the sanitizer has a handler of its own";
+    if (runtime::kSanitized) GTEST_SKIP() << "the sanitizer has a handler of its own";
     const ChildEnd end = endOf([](int) {
-        const foundation::StackGuard guard;
+        const runtime::StackGuard guard;
         fall(0);
     });
     ASSERT_TRUE(WIFEXITED(end.status));
@@ -97,10 +96,10 @@ TEST(Runaway, ThatUsesUpItsStackEndsWithOneLine) {
 }
 
 TEST(Runaway, MayBeAnyThreadWithAGuard) {
-    if (foundation::kSanitized) GTEST_SKIP() << "the sanitizer has a handler of its own";
+    if (runtime::kSanitized) GTEST_SKIP() << "the sanitizer has a handler of its own";
     const ChildEnd end = endOf([](int) {
         std::thread([] {
-            const foundation::StackGuard guard;
+            const runtime::StackGuard guard;
             fall(0);
         }).join();
     });
@@ -109,14 +108,14 @@ TEST(Runaway, MayBeAnyThreadWithAGuard) {
 }
 
 TEST(Runaway, IsNoOtherCrash) {
-    if (foundation::kSanitized) GTEST_SKIP() << "the sanitizer has a handler of its own";
+    if (runtime::kSanitized) GTEST_SKIP() << "the sanitizer has a handler of its own";
     const auto ways = {std::function<void(int)>([](int) {
-                           const foundation::StackGuard guard;
+                           const runtime::StackGuard guard;
                            volatile int* volatile nowhere = nullptr;
                            *nowhere = 1;  // NOLINT: meant to crash
                        }),
                        std::function<void(int)>([](int) {
-                           const foundation::StackGuard guard;
+                           const runtime::StackGuard guard;
                            raise(SIGSEGV);
                        })};
     for (const auto& crash : ways) {

@@ -6,17 +6,17 @@
 #include <cerrno>
 #include <filesystem>
 
-#include "foundation/bytes.h"
-#include "foundation/process.h"
-#include "foundation/url.h"
+#include "base/bytes.h"
+#include "runtime/process.h"
 #include "src/messages.h"
 #include "support/message_capture.h"
 #include "support/test_platform.h"
+#include "values/url.h"
 
 namespace pinwell {
 namespace {
 
-using foundation::Data;
+using base::Data;
 using test::MessageCapture;
 
 class Bundle : public testing::Test {
@@ -65,7 +65,7 @@ TEST_F(Bundle, WithoutATicketFileHasNoTicketAndPrintsNothing) {
 
 TEST_F(Bundle, ReadsBackExactlyTheBytesOfTheTicketFile) {
     test::writeFile(ticketPath(), std::string_view("ticket\0bytes\n", 13));
-    EXPECT_EQ(bundle.ticketData(), foundation::toData(std::string_view("ticket\0bytes\n", 13)));
+    EXPECT_EQ(bundle.ticketData(), base::toData(std::string_view("ticket\0bytes\n", 13)));
 }
 
 TEST_F(Bundle, TakesNoTicketFromASymbolicLink) {
@@ -121,7 +121,7 @@ TEST_F(Bundle, NeverReplacesACompatibilityLink) {
     std::optional<Error> error = Error::osStatus(1);
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_FALSE(bundle.writeNewTicketDataFromURL(source(), &error));
-    EXPECT_EQ(output.text(), foundation::processName() + " will not replace the compatibility symlink at " +
+    EXPECT_EQ(output.text(), runtime::processName() + " will not replace the compatibility symlink at " +
                                  ticketURL().absoluteString() + ". Please remove it manually\n");
     EXPECT_EQ(bundle.appropriateExitCode(), 73);
     EXPECT_FALSE(error.has_value());
@@ -133,7 +133,7 @@ TEST_F(Bundle, NeverReplacesADirectoryInTheTicketsPlaceWhichItTakesForALink) {
     std::optional<Error> error = Error::osStatus(1);
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_FALSE(bundle.writeNewTicketDataFromURL(source(), &error));
-    EXPECT_EQ(output.text(), foundation::processName() + " will not replace the compatibility symlink at " +
+    EXPECT_EQ(output.text(), runtime::processName() + " will not replace the compatibility symlink at " +
                                  ticketURL().absoluteString() + ". Please remove it manually\n");
     EXPECT_EQ(bundle.appropriateExitCode(), 73);
     EXPECT_FALSE(error.has_value());
@@ -301,7 +301,7 @@ TEST_F(LinkedBundle, IsWrittenAsItWasFoundWhenAnotherTakesItsPlaceMeanwhile) {
     EXPECT_EQ(test::readFile(ticketPath()), "THE OTHER'S TICKET");
 
     // A reader during its life sees the written ticket.
-    EXPECT_EQ(again().ticketData(), foundation::toData(std::string_view("NEW TICKET")));
+    EXPECT_EQ(again().ticketData(), base::toData(std::string_view("NEW TICKET")));
 }
 
 }  // namespace

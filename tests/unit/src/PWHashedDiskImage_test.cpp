@@ -5,20 +5,20 @@
 #include <fstream>
 #include <limits>
 
+#include "base/byte_io.h"
+#include "base/bytes.h"
 #include "disk_image_fixture.h"
 #include "formats/tm_ticket.h"
-#include "foundation/byte_writer.h"
-#include "foundation/bytes.h"
-#include "foundation/process.h"
-#include "foundation/value.h"
+#include "runtime/process.h"
 #include "src/cdhash_extract.h"
 #include "support/resident_memory.h"
+#include "values/value.h"
 
 namespace pinwell {
 namespace {
 
-using foundation::ByteWriter;
-using foundation::Data;
+using base::ByteWriter;
+using base::Data;
 using test::DiskImageBuilder;
 using test::Lines;
 using test::makeBlob;
@@ -38,7 +38,7 @@ class DiskImage : public test::DiskImageTest {
         return linesOfReading(code);
     }
     static std::string codesignLine(std::uint64_t offset, std::uint64_t length) {
-        return foundation::format("Codesign offset 0x%llx length: %llu", offset, length);
+        return values::format("Codesign offset 0x%llx length: %llu", offset, length);
     }
 };
 
@@ -54,8 +54,8 @@ TEST_F(DiskImage, SignedHasTheSuperblobAndItsBlobsInIndexOrder) {
     const Data superblob = DiskImageBuilder::signature().build();
     EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(superblob), 0),
               (Lines{codesignLine(1000, superblob.size()),
-                     foundation::format("Stored Codesign length: %tu number of blobs: 3", superblob.size()),
-                     foundation::format("Total Length: %tu Found blobs: 3", superblob.size())}));
+                     values::format("Stored Codesign length: %tu number of blobs: 3", superblob.size()),
+                     values::format("Total Length: %tu Found blobs: 3", superblob.size())}));
     const auto image = open();
     EXPECT_EQ(image.superblob(), superblob);
     EXPECT_EQ(image.numBlobs(), 3U);
@@ -157,7 +157,7 @@ TEST_F(DiskImage, ThatDoesNotTellItsSizeIsTooSmall) {
 TEST_F(DiskImage, Of511BytesIsTooSmall) {
     Data bytes = DiskImageBuilder().data({}).build();
     bytes.pop_back();
-    test::writeFile(path, foundation::ByteView(bytes));
+    test::writeFile(path, base::ByteView(bytes));
     EXPECT_EQ(linesOfReading(66), Lines{"image.dmg is too small (511 bytes) to be a proper disk image"});
 }
 
@@ -188,9 +188,9 @@ TEST_F(DiskImage, WithAnotherMagicIsRefusedWithItsBytesAsALittleEndianNumber) {
 }
 
 TEST_F(DiskImage, OfVersion3IsRefused) {
-    EXPECT_EQ(linesOfReading(DiskImageBuilder().version(3), 66),
-              Lines{foundation::processName() +
-                    " only supports version 4 disk images while image.dmg is version 3."});
+    EXPECT_EQ(
+        linesOfReading(DiskImageBuilder().version(3), 66),
+        Lines{runtime::processName() + " only supports version 4 disk images while image.dmg is version 3."});
 }
 
 TEST_F(DiskImage, WhoseSignatureOverflowsIsRefusedInSilence) {
@@ -211,12 +211,11 @@ TEST_F(DiskImage, WhoseSignatureEndsAsFarAsNumbersGoIsRefusedAloud) {
 TEST_F(DiskImage, WhoseSignatureDoesNotEndAtTheTrailerIsRefused) {
     const Data superblob = emptySuperblob();
     for (const std::uint64_t length : {11U, 13U}) {
-        EXPECT_EQ(
-            linesOfReading(DiskImageBuilder().superblob(superblob).codeSignLength(length), 66),
-            (Lines{codesignLine(1000, length),
-                   foundation::format("In a good disk image, the stored code signature end MUST match the "
-                                      "UDIF header start. It currently doesn't. (%llu vs 1012)",
-                                      1000 + length)}));
+        EXPECT_EQ(linesOfReading(DiskImageBuilder().superblob(superblob).codeSignLength(length), 66),
+                  (Lines{codesignLine(1000, length),
+                         values::format("In a good disk image, the stored code signature end MUST match the "
+                                        "UDIF header start. It currently doesn't. (%llu vs 1012)",
+                                        1000 + length)}));
     }
     EXPECT_EQ(platform.files.count("handle.read"), 2U) << "only the trailers should have been read";
 }
@@ -336,12 +335,12 @@ class SparseDiskImage : public DiskImage {
   protected:
     void putSparse(std::uint64_t signatureLength, const Data& startOfSignature = {}) {
         Data start(1000, std::byte{0xDA});
-        foundation::append(start, startOfSignature);
-        test::writeFile(path, foundation::ByteView(start));
+        base::append(start, startOfSignature);
+        test::writeFile(path, base::ByteView(start));
         std::filesystem::resize_file(path, 1000 + signatureLength);
         const Data trailer =
             DiskImageBuilder().codeSignOffset(1000).codeSignLength(signatureLength).trailer();
-        std::ofstream(path, std::ios::binary | std::ios::app) << foundation::toString(trailer);
+        std::ofstream(path, std::ios::binary | std::ios::app) << base::toString(trailer);
         ASSERT_EQ(std::filesystem::file_size(path), 1000 + signatureLength + 512);
     }
 };
@@ -360,7 +359,7 @@ class LargeDiskImage : public SparseDiskImage {
   protected:
     std::optional<Data> hashOfTheSignature() {
         const auto basic = basicCodeProperties(url, platform.servicesWith(*service));
-        const foundation::Value properties(basic);
+        const values::Value properties(basic);
         const Data* hash = properties["cdhash"].data();
         return hash == nullptr ? std::nullopt : std::optional(*hash);
     }
@@ -413,7 +412,7 @@ TEST_F(DiskImage, IsNeverReadInFrontOfItsSignature) {
 TEST_F(DiskImage, ReturnsItsTicketWithoutTheBlobsHeader) {
     put(DiskImageBuilder().superblob(
         DiskImageBuilder::signature().blob(0x10002, test::ticketBlob("TICKET"))));
-    EXPECT_EQ(open().ticketData(), foundation::toData("TICKET"));
+    EXPECT_EQ(open().ticketData(), base::toData("TICKET"));
 }
 
 TEST_F(DiskImage, WithoutATicketReturnsNone) {
@@ -427,13 +426,13 @@ TEST_F(DiskImage, WithTwoTicketsReturnsTheLaterOne) {
     put(DiskImageBuilder().superblob(SuperBlobBuilder()
                                          .blob(0x10002, test::ticketBlob("FIRST"))
                                          .blob(0x10002, test::ticketBlob("SECOND"))));
-    EXPECT_EQ(open().ticketData(), foundation::toData("SECOND"));
+    EXPECT_EQ(open().ticketData(), base::toData("SECOND"));
 }
 
 TEST_F(DiskImage, KnowsItsTicketByTheSlotWhateverTheMagicIs) {
     put(DiskImageBuilder().superblob(
-        SuperBlobBuilder().blob(0x10002, makeBlob(0x12345678, foundation::asBytes("TICKET")))));
-    EXPECT_EQ(open().ticketData(), foundation::toData("TICKET"));
+        SuperBlobBuilder().blob(0x10002, makeBlob(0x12345678, base::asBytes("TICKET")))));
+    EXPECT_EQ(open().ticketData(), base::toData("TICKET"));
 }
 
 TEST_F(DiskImage, HasNoTicketInABlobThatIsShorterThanItsHeader) {

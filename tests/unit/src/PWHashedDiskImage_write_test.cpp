@@ -6,19 +6,19 @@
 #include <filesystem>
 #include <fstream>
 
+#include "base/byte_io.h"
+#include "base/bytes.h"
 #include "disk_image_fixture.h"
-#include "foundation/byte_writer.h"
-#include "foundation/bytes.h"
-#include "foundation/sanitized.h"
-#include "foundation/url.h"
-#include "foundation/value.h"
+#include "runtime/process.h"
 #include "support/resident_memory.h"
+#include "values/url.h"
+#include "values/value.h"
 
 namespace pinwell {
 namespace {
 
-using foundation::ByteWriter;
-using foundation::Data;
+using base::ByteWriter;
+using base::Data;
 using test::DiskImageBuilder;
 using test::Lines;
 using test::makeBlob;
@@ -51,7 +51,7 @@ class DiskImageWriting : public test::DiskImageTest {
         const bool done = image._writeNewTicketDataFromURL(from, url, deleteExisting, &error);
         lines = output.lines();
         exitCode = image.appropriateExitCode();
-        header = foundation::toData(image.dmgHeader().bytes());
+        header = base::toData(image.dmgHeader().bytes());
         return done;
     }
 
@@ -91,11 +91,11 @@ class LargeDiskImageWriting : public DiskImageWriting {
   protected:
     void putSparse(std::uint64_t length, const SuperBlobBuilder& superblob) {
         Data start(1000, std::byte{0xDA});
-        foundation::append(start, superblob.build());
-        test::writeFile(path, foundation::ByteView(start));
+        base::append(start, superblob.build());
+        test::writeFile(path, base::ByteView(start));
         std::filesystem::resize_file(path, 1000 + length);
         std::ofstream(path, std::ios::binary | std::ios::app)
-            << foundation::toString(DiskImageBuilder().codeSignOffset(1000).codeSignLength(length).trailer());
+            << base::toString(DiskImageBuilder().codeSignOffset(1000).codeSignLength(length).trailer());
         test::writeFile(source.path(), std::string_view("TICKET"));
     }
     static SuperBlobBuilder signatureThatEndsIn(std::uint32_t slot, std::uint32_t length) {
@@ -113,14 +113,14 @@ TEST_F(LargeDiskImageWriting, AddsATicketToASuperblobOf200Mebibytes) {
     auto image = open();
     EXPECT_TRUE(image._writeNewTicketDataFromURL(source, url, false, &error));
     // A sanitizer needs its own memory for the bytes read.
-    if (!foundation::kSanitized) {
+    if (!runtime::kSanitized) {
         EXPECT_LE(test::residentMemory(), before + test::kLittleMemory);
     }
     EXPECT_EQ(std::filesystem::file_size(path), 1000 + kLength + 8 + 8 + 6 + 512);
     auto again = open();
     EXPECT_EQ(again.appropriateExitCode(), 0);
     EXPECT_EQ(again.blobs().size(), 5U);
-    EXPECT_EQ(again._ticketData(), foundation::toData("TICKET"));
+    EXPECT_EQ(again._ticketData(), base::toData("TICKET"));
 }
 
 TEST_F(LargeDiskImageWriting, ReplacesAStaleTicketOf200Mebibytes) {
@@ -166,7 +166,7 @@ TEST_F(DiskImageWriting, AppendsTheTicketToASignedImagesBlobsWhichMoveBy8) {
     EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(signedAndStapled("TICKET"))));
     EXPECT_EQ(contents().size(), 1000 + before.size() + 8 + 14 + 512);
     EXPECT_EQ(open().blobs().back().slotType, 0x10002U);
-    EXPECT_EQ(open().blobs()[0].at("offset"), foundation::Value(44U));
+    EXPECT_EQ(open().blobs()[0].at("offset"), values::Value(44U));
     EXPECT_FALSE(printedTruncation());
 }
 
@@ -258,12 +258,12 @@ TEST_F(DiskImageWriting, KeepsDescribingTheFileAsItWasRead) {
     put(DiskImageBuilder().superblob(stapled("OLD")));
     test::writeFile(directory / "new.ticket", std::string_view("NEWER"));
     auto image = open();
-    EXPECT_EQ(image.ticketData(), foundation::toData("OLD"));
+    EXPECT_EQ(image.ticketData(), base::toData("OLD"));
     ASSERT_TRUE(image._writeNewTicketDataFromURL(source, url, false, nullptr));
     EXPECT_EQ(image.superblob(), stapled("OLD").build());
     EXPECT_EQ(image.csLength(), 31U);
-    EXPECT_EQ(image.ticketData(), foundation::toData("OLD"));
-    EXPECT_EQ(open().ticketData(), foundation::toData("NEWER"));
+    EXPECT_EQ(image.ticketData(), base::toData("OLD"));
+    EXPECT_EQ(open().ticketData(), base::toData("NEWER"));
 }
 
 TEST_F(DiskImageWriting, DeletesTheTicketOfASignedImage) {
@@ -273,8 +273,8 @@ TEST_F(DiskImageWriting, DeletesTheTicketOfASignedImage) {
     EXPECT_EQ(contents(), contentsOf(DiskImageBuilder().superblob(after)));
     EXPECT_EQ(before.size() - after.size(), 14U + 8);
     EXPECT_EQ(lines[1].substr(lines[1].find(" to offset")), " to offset 36.");
-    EXPECT_EQ(lines.back(), foundation::format("Truncating image.dmg from to %tu bytes to %tu bytes.",
-                                               1000 + before.size() + 512, 1000 + after.size() + 512));
+    EXPECT_EQ(lines.back(), values::format("Truncating image.dmg from to %tu bytes to %tu bytes.",
+                                           1000 + before.size() + 512, 1000 + after.size() + 512));
     EXPECT_EQ(exitCode, 0);
 }
 
@@ -531,7 +531,7 @@ class CodeSignedDiskImage : public DiskImageWriting {
         test::writeFile(directory / "new.ticket", ticket);
         EXPECT_TRUE(reopen()->writeNewTicketDataFromURL(source, nullptr));
         const auto image = reopen();
-        EXPECT_EQ(image->ticketData(), foundation::toData(ticket));
+        EXPECT_EQ(image->ticketData(), base::toData(ticket));
         return image->cdHash();
     }
     std::shared_ptr<PWHashedFile> reopen() {
@@ -571,7 +571,7 @@ TEST_F(CodeSignedDiskImage, WithTwoTicketsKeepsItsSignaturesHashAndIsStapled) {
     const Data hash = test::codeHashOf(2, DiskImageBuilder::codeDirectory());
     const auto image = reopen();
     EXPECT_EQ(image->appropriateExitCode(), 0);
-    EXPECT_EQ(image->ticketData(), foundation::toData("TWO"));
+    EXPECT_EQ(image->ticketData(), base::toData("TWO"));
     EXPECT_EQ(image->cdHash(), hash);
 
     EXPECT_EQ(staple("NEW"), hash);
@@ -598,7 +598,7 @@ TEST_F(CodeSignedDiskImage, UnsignedWithTwoTicketsKeepsItsSyntheticHash) {
     put(DiskImageBuilder());
     const auto hash = reopen()->cdHash();
     put(DiskImageBuilder().superblob(stapled("ONE").blob(0x10002, ticketBlob("TWO"))));
-    EXPECT_EQ(reopen()->ticketData(), foundation::toData("TWO"));
+    EXPECT_EQ(reopen()->ticketData(), base::toData("TWO"));
     EXPECT_EQ(reopen()->cdHash(), hash);
     EXPECT_EQ(staple("NEW"), hash);
 }

@@ -11,17 +11,17 @@
 #include <functional>
 #include <thread>
 
-#include "foundation/bytes.h"
-#include "foundation/url.h"
+#include "base/bytes.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/messages.h"
 #include "support/message_capture.h"
 #include "support/test_platform.h"
+#include "values/url.h"
 
 namespace pinwell {
 namespace {
 
-using foundation::Data;
+using base::Data;
 using test::MessageCapture;
 
 class Factory : public testing::Test {
@@ -157,10 +157,10 @@ class Caches : public testing::Test {
 };
 
 TEST_F(Caches, AskTheHookOnce) {
-    file.ticket = foundation::toData("ticket");
-    EXPECT_EQ(file.ticketData(), foundation::toData("ticket"));
-    file.ticket = foundation::toData("another");
-    EXPECT_EQ(file.ticketData(), foundation::toData("ticket"));
+    file.ticket = base::toData("ticket");
+    EXPECT_EQ(file.ticketData(), base::toData("ticket"));
+    file.ticket = base::toData("another");
+    EXPECT_EQ(file.ticketData(), base::toData("ticket"));
     EXPECT_EQ(file.ticketCalls, 1);
 }
 
@@ -191,8 +191,8 @@ TEST_F(Caches, MayAskTheOtherFromInsideAHook) {
         std::optional<Data> _cdHash() override { return ticketData(); }
     };
     Nested nested{platform.directory.url("a.probe"), platform.services()};
-    nested.ticket = foundation::toData("ticket");
-    EXPECT_EQ(nested.cdHash(), foundation::toData("ticket"));
+    nested.ticket = base::toData("ticket");
+    EXPECT_EQ(nested.cdHash(), base::toData("ticket"));
 }
 
 TEST_F(Caches, OfThePlainBaseRaiseAndNameOperationAndClass) {

@@ -3,7 +3,7 @@
 
 #include <filesystem>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "package_fixture.h"
 #include "src/DownloadDelegate.h"
 #include "support/archive_builder.h"
@@ -11,7 +11,7 @@
 namespace pinwell {
 namespace {
 
-using foundation::Data;
+using base::Data;
 using test::ArchiveBuilder;
 using test::MessageCapture;
 using test::PackageBuilder;

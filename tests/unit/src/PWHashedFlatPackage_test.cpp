@@ -7,15 +7,15 @@
 #include <filesystem>
 
 #include "formats/tm_ticket.h"
-#include "foundation/sanitized.h"
 #include "package_fixture.h"
+#include "runtime/process.h"
 #include "support/archive_builder.h"
 #include "support/resident_memory.h"
 
 namespace pinwell {
 namespace {
 
-using foundation::toData;
+using base::toData;
 using test::ArchiveBuilder;
 using test::MessageCapture;
 using test::PackageBuilder;
@@ -349,7 +349,7 @@ TEST_F(FlatPackage, HasTheBeginningOfATicketThatIsLongerThanAny) {
 }
 
 TEST_F(FlatPackage, WithAnEmptyTrailerOfFourGibibytesTakesMemoryForItsExistingBytes) {
-    if (foundation::kSanitized) GTEST_SKIP() << "a sanitizer has memory of its own for what is not there";
+    if (runtime::kSanitized) GTEST_SKIP() << "a sanitizer has memory of its own for what is not there";
     TrailerFields fields;
     fields.length = 0xFFFFFFF0;
     constexpr std::uintmax_t kSize = std::uintmax_t{1} << 40U;
@@ -359,8 +359,7 @@ TEST_F(FlatPackage, WithAnEmptyTrailerOfFourGibibytesTakesMemoryForItsExistingBy
     ASSERT_TRUE(package.hasTrailers());
     EXPECT_EQ(package.dataToAppend()->size(), std::uint64_t{0xFFFFFFF0} + 16 + 19);
     const std::string tail = PackageBuilder().archive({}).trailer(fields).unknown("one").build();
-    EXPECT_TRUE(
-        std::ranges::equal(package.dataToAppend()->view().last(tail.size()), foundation::asBytes(tail)));
+    EXPECT_TRUE(std::ranges::equal(package.dataToAppend()->view().last(tail.size()), base::asBytes(tail)));
     EXPECT_LE(test::residentMemory(), before + test::kLittleMemory);
 }
 

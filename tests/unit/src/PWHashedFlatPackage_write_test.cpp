@@ -5,14 +5,14 @@
 
 #include "formats/package_trailers.h"
 #include "formats/tm_ticket.h"
-#include "foundation/url.h"
 #include "package_fixture.h"
 #include "support/archive_builder.h"
+#include "values/url.h"
 
 namespace pinwell {
 namespace {
 
-using foundation::toData;
+using base::toData;
 using test::MessageCapture;
 using test::PackageBuilder;
 using testing::Contains;
@@ -25,7 +25,7 @@ class FlatPackageWriting : public test::FlatPackageTest {
     FlatPackageWriting() {
         newTicket("NEW TICKET");
         platform.files.answerCloning(false);
-        platform.files.answerTemporaryDirectory(foundation::URL::fileURLWithPath(temporary.path()));
+        platform.files.answerTemporaryDirectory(values::URL::fileURLWithPath(temporary.path()));
     }
 
     void newTicket(std::string_view bytes) { test::writeFile(source.path(), bytes); }
@@ -37,7 +37,7 @@ class FlatPackageWriting : public test::FlatPackageTest {
         return package._writeNewTicketDataFromURL(source, url, false, &error);
     }
 
-    const foundation::URL source = platform.directory.url("new.ticket");
+    const values::URL source = platform.directory.url("new.ticket");
     const test::TemporaryDirectory temporary;
 };
 
@@ -223,9 +223,9 @@ TEST_F(FlatPackageWriting, NoTicketFileAtAllIsRefused) {
 
 TEST_F(FlatPackageWriting, NamesTheTargetThatItWritesAndNotTheFileThatWasRead) {
     put(PackageBuilder().terminator().ticket("A MUCH LONGER OLD TICKET"));
-    const foundation::URL clone = platform.directory.url("Clone.pkg");
+    const values::URL clone = platform.directory.url("Clone.pkg");
     std::filesystem::copy_file(path, clone.path());
-    const auto saidOf = [&](const std::optional<foundation::URL>& from, bool deleteExisting) {
+    const auto saidOf = [&](const std::optional<values::URL>& from, bool deleteExisting) {
         const MessageCapture output(kVerbosityVerbose);
         package._writeNewTicketDataFromURL(from, clone, deleteExisting, nullptr);
         return output.lines().back();
@@ -314,7 +314,7 @@ TEST_F(FlatPackageWriting, CutShortAnywhereLeavesAFileThatCanBeStapledAgain) {
             put(before);
             test::TestPlatform failing;
             failing.files.answerCloning(false);
-            failing.files.answerTemporaryDirectory(foundation::URL::fileURLWithPath(temporary.path()));
+            failing.files.answerTemporaryDirectory(values::URL::fileURLWithPath(temporary.path()));
             PWHashedFlatPackage file{url, failing.services()};
             file.ticketData();
             // After the check for cloning and the read of the ticket.
@@ -366,7 +366,7 @@ TEST_F(FlatPackageWriting, NothingIsSavedWhereNoTrailerMoves) {
 TEST_F(FlatPackageWriting, NothingIsSavedWhereACloneIsWritten) {
     const std::string before = PackageBuilder().terminator().ticket("OLD").unknown("one").build();
     put(before);
-    const foundation::URL clone = platform.directory.url("clone.pkg");
+    const values::URL clone = platform.directory.url("clone.pkg");
     test::writeFile(clone.path(), before);
     package.ticketData();
     EXPECT_TRUE(package._writeNewTicketDataFromURL(source, clone, false, nullptr));

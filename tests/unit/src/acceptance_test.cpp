@@ -12,7 +12,7 @@
 namespace pinwell {
 namespace {
 
-using foundation::Data;
+using base::Data;
 using test::MessageCapture;
 using test::unsignedTicket;
 
@@ -162,9 +162,9 @@ TEST_F(Acceptance, ADownloadedTicketIsKeptInTheTemporaryDirectory) {
     const MessageCapture output(kVerbosityVerbose);
     const Data ticket = unsignedTicket({hash(0xAB)});
     controller->writeDownloadedData(ticket, nullptr);
-    EXPECT_TRUE(output.contains(foundation::format("Downloaded ticket has been stored at %@.",
-                                                   platform.directory.url("tmp/REQUEST.ticket"))));
-    EXPECT_EQ(test::readFile(platform.directory / "tmp/REQUEST.ticket"), foundation::toString(ticket));
+    EXPECT_TRUE(output.contains(values::format("Downloaded ticket has been stored at %@.",
+                                               platform.directory.url("tmp/REQUEST.ticket"))));
+    EXPECT_EQ(test::readFile(platform.directory / "tmp/REQUEST.ticket"), base::toString(ticket));
     EXPECT_EQ(file->appropriateExitCode(), 0);
 }
 
@@ -196,7 +196,7 @@ TEST_F(Acceptance, StapleWritesTheTicketIntoTheArtefact) {
     controller->setOperation(kOperationStaple);
     const Data ticket = unsignedTicket({hash(0xAB)});
     controller->writeDownloadedData(ticket, nullptr);
-    EXPECT_EQ(test::readFile(stapledPath()), foundation::toString(ticket));
+    EXPECT_EQ(test::readFile(stapledPath()), base::toString(ticket));
     EXPECT_EQ(file->appropriateExitCode(), 0);
 }
 
@@ -299,7 +299,7 @@ TEST_F(Report, AFailedStapleThatSetsNoCodeIsFoundWhenReadingBack) {
 TEST_F(Report, AStapledTicketThatReadsBackRevokedIsReportedAsBothAndEndsWith73) {
     controller->setOperation(kOperationStaple);
     file->setAppropriateExitCode(0);
-    test::writeFile(stapledPath(), foundation::ByteView(unsignedTicket({hash(0xAB)}, 1)));
+    test::writeFile(stapledPath(), base::ByteView(unsignedTicket({hash(0xAB)}, 1)));
     const MessageCapture output(kVerbosityNormal);
     EXPECT_EQ(report(), 73);
     ASSERT_EQ(output.lines().size(), 3U);
@@ -374,7 +374,7 @@ TEST_F(Report, DryrunAndForceHaveNoEffect) {
     controller->setOperation(kOperationStaple);
     const Data ticket = unsignedTicket({hash(0xAB)});
     controller->writeDownloadedData(ticket, nullptr);
-    EXPECT_EQ(test::readFile(stapledPath()), foundation::toString(ticket));
+    EXPECT_EQ(test::readFile(stapledPath()), base::toString(ticket));
     controller->writeDownloadedData(unsignedTicket({hash(0x01)}), nullptr);
     EXPECT_EQ(file->appropriateExitCode(), 65);
 }

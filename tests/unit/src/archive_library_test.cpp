@@ -9,13 +9,13 @@
 #include <string>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "package_fixture.h"
 
 namespace pinwell::test {
 namespace {
 
-using foundation::Data;
+using base::Data;
 using testing::ElementsAre;
 using testing::IsEmpty;
 

@@ -9,9 +9,9 @@
 namespace pinwell {
 namespace {
 
-using foundation::Data;
-using foundation::Dictionary;
-using foundation::Value;
+using base::Data;
+using values::Dictionary;
+using values::Value;
 
 class BasicCodeProperties : public testing::Test {
   protected:
@@ -22,12 +22,12 @@ class BasicCodeProperties : public testing::Test {
         information.flags = 0x10002;
         information.identifier = "com.example.app";
         information.teamIdentifier = "TEAM123456";
-        information.secureTimestamp = foundation::Date{1795377300};
+        information.secureTimestamp = values::Date{1795377300};
         platform.codeSigning.information = information;
     }
 
     Value properties() {
-        return basicCodeProperties(foundation::URL::fileURLWithPath("/Some.app"), platform.services());
+        return basicCodeProperties(values::URL::fileURLWithPath("/Some.app"), platform.services());
     }
 
     test::TestPlatform platform;
@@ -139,7 +139,7 @@ class HashesOfAnArtefact : public testing::Test {
         codeSigning.information->digestAlgorithms = {1, 2};  // the third one has none
     }
     std::vector<CodeHash> hashes() {
-        return listableHashes(codeHash(2, 1), foundation::URL::fileURLWithPath("/artefact"), codeSigning);
+        return listableHashes(codeHash(2, 1), values::URL::fileURLWithPath("/artefact"), codeSigning);
     }
 
     test::FakeCodeSigningService codeSigning;

@@ -6,13 +6,13 @@
 
 #include <filesystem>
 
-#include "foundation/bytes.h"
-#include "foundation/url.h"
+#include "base/bytes.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/messages.h"
 #include "support/disk_image_builder.h"
 #include "support/message_capture.h"
 #include "support/test_platform.h"
+#include "values/url.h"
 
 namespace pinwell::test {
 
@@ -28,21 +28,19 @@ class DiskImageTest : public testing::Test {
         platform.codeSigning.detachedInformation->digestAlgorithms = {2};
     }
 
-    static foundation::Data syntheticHash() { return foundation::Data(20, std::byte{0xCD}); }
+    static base::Data syntheticHash() { return base::Data(20, std::byte{0xCD}); }
 
-    void put(const DiskImageBuilder& builder) { writeFile(path, foundation::ByteView(builder.build())); }
+    void put(const DiskImageBuilder& builder) { writeFile(path, base::ByteView(builder.build())); }
     PWHashedDiskImage open() { return {url, platform.services()}; }
 
     /// The image's present bytes.
     std::string contents() const { return readFile(path); }
-    static std::string contentsOf(const DiskImageBuilder& builder) {
-        return foundation::toString(builder.build());
-    }
+    static std::string contentsOf(const DiskImageBuilder& builder) { return base::toString(builder.build()); }
 
     TestPlatform platform;
     const TemporaryDirectory& directory = platform.directory;
     const std::string path = directory / "image.dmg";
-    const foundation::URL url = directory.url("image.dmg");
+    const values::URL url = directory.url("image.dmg");
 };
 
 }  // namespace pinwell::test

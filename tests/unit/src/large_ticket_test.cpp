@@ -7,21 +7,21 @@
 #include <filesystem>
 #include <utility>
 
-#include "foundation/bytes.h"
-#include "foundation/url.h"
-#include "foundation/value.h"
+#include "base/bytes.h"
 #include "src/messages.h"
 #include "support/controller_run.h"
 #include "support/message_capture.h"
+#include "values/url.h"
+#include "values/value.h"
 
 namespace pinwell {
 namespace {
 
-using foundation::Data;
-using foundation::Value;
+using base::Data;
 using test::ControllerRun;
 using test::MessageCapture;
 using test::unsignedTicket;
+using values::Value;
 
 class LargeTicket : public testing::Test {
   protected:
@@ -42,7 +42,7 @@ class LargeTicket : public testing::Test {
         start("https://assets.example/${f}");
         const auto task = run.platform.https.sessions.back()->downloadTasks.at(0);
         task->answered = https::HTTPResponse{*task->request.url, status, {}};
-        test::writeFile(run.platform.directory / "tmp/download", foundation::ByteView(body));
+        test::writeFile(run.platform.directory / "tmp/download", base::ByteView(body));
         return run.platform.exitStatusOf([&] {
             run.controller.didFinishDownloading(*run.platform.https.sessions.back(), *task,
                                                 run.platform.directory.url("tmp/download"));
@@ -75,7 +75,7 @@ TEST_F(LargeTicket, AMillionTokensAreReplacedInOnePass) {
 }
 
 TEST_F(LargeTicket, WithoutASessionIsNotUnderWay) {
-    run.platform.https.failure = foundation::Error(std::string(foundation::kURLErrorDomain), 14, "no thread");
+    run.platform.https.failure = base::Error(std::string(base::kURLErrorDomain), 14, "no thread");
     EXPECT_FALSE(start("https://assets.example/${f}"));
 }
 
@@ -107,7 +107,7 @@ TEST_F(LargeTicket, ATicketOfTheAnnouncedSizeIsJudgedAndKept) {
     EXPECT_NE(output.text().find("Big ticket response is "), std::string::npos);
     EXPECT_TRUE(
         output.contains("Downloaded large ticket size is " + std::to_string(ticket.size()) + " bytes"));
-    EXPECT_EQ(test::readFile(run.platform.directory / "tmp/REQUEST.ticket"), foundation::toString(ticket));
+    EXPECT_EQ(test::readFile(run.platform.directory / "tmp/REQUEST.ticket"), base::toString(ticket));
 }
 
 TEST_F(LargeTicket, ATicketOfAnotherSizeEndsWith65) {
@@ -122,7 +122,7 @@ TEST_F(LargeTicket, ATicketOfAnotherSizeEndsWith65) {
 TEST_F(LargeTicket, TheSizeIsCheckedBeforeTheStatus) {
     run.controller.setLargeTicketSize(5);
     const MessageCapture output(kVerbosityNormal);
-    EXPECT_EQ(finish(foundation::toData("Not here"), 404), 65);
+    EXPECT_EQ(finish(base::toData("Not here"), 404), 65);
     EXPECT_EQ(output.lines()[0], "We were expecting a ticket size of 5 but download a ticket of size 8");
 }
 
@@ -172,7 +172,7 @@ TEST_F(LargeTicket, AResponseThatIsNotHTTPIsJudgedByItsBody) {
     run.controller.setLargeTicketSize(ticket.size());
     start("https://assets.example/${f}");
     const auto& session = run.platform.https.sessions.back();
-    test::writeFile(run.platform.directory / "tmp/download", foundation::ByteView(ticket));
+    test::writeFile(run.platform.directory / "tmp/download", base::ByteView(ticket));
     const MessageCapture output(kVerbosityVerbose);
     EXPECT_EQ(run.platform.exitStatusOf([&] {
         run.controller.didFinishDownloading(*session, *session->downloadTasks.at(0),
@@ -229,7 +229,7 @@ TEST_F(LargeTicket, CompletionWithoutAnErrorDoesNothing) {
 
 TEST_F(LargeTicket, ThatFailsToDownloadGivesTheLockUp) {
     const auto isLocked = [&] {
-        const foundation::FileDescriptor other(open(run.artefact().c_str(), O_RDONLY | O_CLOEXEC));
+        const base::FileDescriptor other(open(run.artefact().c_str(), O_RDONLY | O_CLOEXEC));
         return flock(other.get(), LOCK_EX | LOCK_NB) != 0 && errno == EWOULDBLOCK;
     };
     auto lock = run.platform.files.lockItem(URL::fileURLWithPath(run.artefact()), [] {});
@@ -243,8 +243,7 @@ TEST_F(LargeTicket, ThatFailsToDownloadGivesTheLockUp) {
     EXPECT_TRUE(isLocked());
 
     const MessageCapture output(kVerbosityQuiet);
-    run.controller.didComplete(*session, *task,
-                               Error(std::string(foundation::kURLErrorDomain), 1, "cut off"));
+    run.controller.didComplete(*session, *task, Error(std::string(base::kURLErrorDomain), 1, "cut off"));
     EXPECT_FALSE(isLocked());
 }
 

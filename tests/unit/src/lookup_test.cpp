@@ -3,22 +3,22 @@
 
 #include <filesystem>
 
-#include "foundation/base64.h"
-#include "foundation/bytes.h"
-#include "foundation/json.h"
-#include "foundation/value.h"
+#include "base/bytes.h"
+#include "base/text.h"
 #include "src/messages.h"
 #include "support/controller_run.h"
 #include "support/message_capture.h"
+#include "values/json.h"
+#include "values/value.h"
 
 namespace pinwell {
 namespace {
 
-using foundation::Data;
-using foundation::Value;
+using base::Data;
 using test::ControllerRun;
 using test::MessageCapture;
 using test::unsignedTicket;
+using values::Value;
 
 class Lookup : public testing::Test {
   protected:
@@ -40,7 +40,7 @@ class Lookup : public testing::Test {
 TEST_F(Lookup, PostsTheRecordNameAsCompactJSON) {
     ASSERT_TRUE(grab());
     EXPECT_EQ(run.request().method, "POST");
-    EXPECT_EQ(foundation::toString(run.request().body),
+    EXPECT_EQ(base::toString(run.request().body),
               R"({"records":[{"recordName":"2/2/abababababababababababababababababababab"}]})");
     EXPECT_EQ(run.request().headers, (https::Headers{{"Content-Type", "application/json"}}));
     EXPECT_EQ(run.platform.https.sessions[0]->dataTasks[0]->state(), https::TaskState::running);
@@ -95,7 +95,7 @@ TEST_F(Lookup, AContainerThatIsNoURLTextIsPercentEncoded) {
 TEST_F(Lookup, ARecordNameOfAlgorithm0HasVersion1AndNoAlgorithm) {
     run.platform.codeSigning.information->digestAlgorithm.reset();
     ASSERT_TRUE(grab());
-    EXPECT_EQ(foundation::toString(run.request().body),
+    EXPECT_EQ(base::toString(run.request().body),
               R"({"records":[{"recordName":"1/abababababababababababababababababababab"}]})");
 }
 
@@ -103,7 +103,7 @@ TEST_F(Lookup, ARecordNameOfAFortyEightByteHashHoldsAllOfIt) {
     run.platform.codeSigning.information->unique = Data(48, std::byte{0x0F});
     run.platform.codeSigning.information->digestAlgorithm = 4;
     ASSERT_TRUE(grab());
-    const Value body = *foundation::parseJSON(run.request().body);
+    const Value body = *values::parseJSON(run.request().body);
     std::string hex;
     for (int i = 0; i < 48; ++i) hex += "0f";
     EXPECT_EQ(body["records"][std::size_t{0}]["recordName"], Value("2/4/" + hex));
@@ -214,7 +214,7 @@ TEST_F(Lookup, StapleOfAGoodResponseWritesTheTicketAndWorks) {
     ASSERT_TRUE(grab());
     const Data ticket = unsignedTicket({ControllerRun::fileHash()});
     EXPECT_EQ(run.answer(ControllerRun::inlineAnswer(ticket)), 0);
-    EXPECT_EQ(test::readFile(run.stapledPath()), foundation::toString(ticket));
+    EXPECT_EQ(test::readFile(run.stapledPath()), base::toString(ticket));
 }
 
 TEST_F(Lookup, ABrokenPlatformFileIsATransportErrorThatNamesIt) {
@@ -250,9 +250,8 @@ TEST_F(Lookup, AnEmptyBodyEndsWith68) {
 TEST_F(Lookup, AResponseThatIsNotHTTPEndsWith68) {
     ASSERT_TRUE(grab());
     const auto completion = run.platform.https.sessions[0]->completions[0];
-    EXPECT_EQ(
-        run.platform.exitStatusOf([&] { completion(foundation::toData("{}"), std::nullopt, std::nullopt); }),
-        68);
+    EXPECT_EQ(run.platform.exitStatusOf([&] { completion(base::toData("{}"), std::nullopt, std::nullopt); }),
+              68);
 }
 
 TEST_F(Lookup, TheStatusCodeIsNeverLookedAt) {
@@ -332,7 +331,7 @@ TEST_F(Lookup, AnInlineTicketThatIsNoBase64StartsNoDownload) {
 }
 
 TEST_F(Lookup, AnAssetOfTheWrongShapeSpoilsAnInlineTicketButItsURLIsNotLookedAt) {
-    const std::string ticket = foundation::encodeBase64(unsignedTicket({ControllerRun::fileHash()}));
+    const std::string ticket = base::encodeBase64(unsignedTicket({ControllerRun::fileHash()}));
     const auto withAsset = [&](const std::string& asset) {
         return R"({"records":[{"fields":{"signedTicket":{"value":")" + ticket +
                R"("},"signedTicketAsset":{"value":)" + asset + "}}}]}";
@@ -350,7 +349,7 @@ TEST_F(Lookup, AnAssetOfTheWrongShapeSpoilsAnInlineTicketButItsURLIsNotLookedAt)
 
 TEST_F(Lookup, AnInlineTicketWithLineBreaksIsNoTicket) {
     ASSERT_TRUE(grab());
-    std::string encoded = foundation::encodeBase64(unsignedTicket({ControllerRun::fileHash()}));
+    std::string encoded = base::encodeBase64(unsignedTicket({ControllerRun::fileHash()}));
     encoded.insert(64, "\\n");
     EXPECT_EQ(run.answer(R"({"records":[{"fields":{"signedTicket":{"value":")" + encoded + R"("}}}]})"), 65);
 }
@@ -362,7 +361,7 @@ TEST_F(Lookup, AnEmptyInlineTicketIsNoTicket) {
 
 TEST_F(Lookup, AnInlineTicketWinsOverAnAssetWhoseSizeIsStillKept) {
     ASSERT_TRUE(grab());
-    const std::string ticket = foundation::encodeBase64(unsignedTicket({ControllerRun::fileHash()}));
+    const std::string ticket = base::encodeBase64(unsignedTicket({ControllerRun::fileHash()}));
     EXPECT_EQ(
         run.answer(
             R"({"records":[{"fields":{"signedTicket":{"value":")" + ticket +

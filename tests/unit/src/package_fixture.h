@@ -5,12 +5,12 @@
 
 #include <string>
 
-#include "foundation/url.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "src/messages.h"
 #include "support/message_capture.h"
 #include "support/package_builder.h"
 #include "support/test_platform.h"
+#include "values/url.h"
 
 namespace pinwell::test {
 
@@ -27,7 +27,7 @@ class FlatPackageTest : public testing::Test {
 
     TestPlatform platform;
     const std::string path = platform.directory / "Sample.pkg";
-    const foundation::URL url = platform.directory.url("Sample.pkg");
+    const values::URL url = platform.directory.url("Sample.pkg");
     PWHashedFlatPackage package{url, platform.services()};
 };
 

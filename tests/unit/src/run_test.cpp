@@ -84,7 +84,7 @@ TEST_F(Run, LocksNothingThatIsNotThere) {
 }
 
 bool isLocked(const std::string& path) {
-    const foundation::FileDescriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+    const base::FileDescriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));
     return flock(file.get(), LOCK_EX | LOCK_NB) != 0 && errno == EWOULDBLOCK;
 }
 
@@ -97,7 +97,7 @@ TEST_F(Run, LocksTheArtefactWhileItWaits) {
 
 TEST_F(Run, SaysInItsVerboseOutputThatItWaitsForALock) {
     const MessageCapture verbose(kVerbosityVerbose);
-    const foundation::FileDescriptor other(open(made.artefact().c_str(), O_RDONLY | O_CLOEXEC));
+    const base::FileDescriptor other(open(made.artefact().c_str(), O_RDONLY | O_CLOEXEC));
     ASSERT_EQ(flock(other.get(), LOCK_EX), 0);
     std::thread release([&] {
         std::this_thread::sleep_for(std::chrono::milliseconds(50));
@@ -124,7 +124,7 @@ TEST_F(Run, ThatValidatesLocksNothing) {
 }
 
 TEST_F(Run, WithoutASessionEndsLikeOneWithoutAConnection) {
-    platform.https.failure = foundation::Error(std::string(foundation::kURLErrorDomain), 14, "no thread");
+    platform.https.failure = base::Error(std::string(base::kURLErrorDomain), 14, "no thread");
     EXPECT_EQ(platform.exitStatusOf([this] { staple(); }), kExitNoHost);
     EXPECT_THAT(output.lines(), Contains(StartsWith("error is ")));
 }

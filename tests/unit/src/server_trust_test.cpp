@@ -1,24 +1,23 @@
 // The servers that the controller accepts.
 #include <gtest/gtest.h>
 
-#include "foundation/value.h"
 #include "src/messages.h"
 #include "support/controller_run.h"
 #include "support/message_capture.h"
+#include "values/value.h"
 
 namespace pinwell {
 namespace {
 
-using foundation::Dictionary;
 using test::ControllerRun;
 using test::MessageCapture;
+using values::Dictionary;
 
 class ServerTrust : public testing::Test {
   protected:
     void SetUp() override {
         const trust::PolicyRef initial = trust::pinnedServerPolicy("api.lumora.example");
-        trust::CertificateRef certificate =
-            run.platform.trust.parseCertificate(foundation::asBytes("server"));
+        trust::CertificateRef certificate = run.platform.trust.parseCertificate(base::asBytes("server"));
         const auto made = run.platform.trust.makeTrust({certificate}, initial);
         ASSERT_TRUE(made);
         serverTrust = *made;
@@ -75,10 +74,9 @@ TEST_F(ServerTrust, EveryOtherVerdictIsRefusedAndPrintedAsItsNumber) {
         const MessageCapture output(kVerbosityNormal);
         EXPECT_EQ(judge(), https::Disposition::cancelChallenge);
         EXPECT_FALSE(credential.has_value());
-        EXPECT_EQ(output.lines()[0],
-                  foundation::format("Certificate trust evaluation did not return expected "
-                                     "result. (%d) ",
-                                     static_cast<std::uint32_t>(verdict)));
+        EXPECT_EQ(output.lines()[0], values::format("Certificate trust evaluation did not return expected "
+                                                    "result. (%d) ",
+                                                    static_cast<std::uint32_t>(verdict)));
     }
 }
 

@@ -2,18 +2,18 @@
 
 #include <gtest/gtest.h>
 
-#include "foundation/bytes.h"
-#include "foundation/url.h"
+#include "base/bytes.h"
 #include "src/messages.h"
 #include "support/disk_image_builder.h"
 #include "support/message_capture.h"
 #include "support/test_platform.h"
+#include "values/url.h"
 
 namespace pinwell {
 namespace {
 
+using base::Data;
 using codesign::kSuccess;
-using foundation::Data;
 using test::DiskImageBuilder;
 using test::MessageCapture;
 using Lines = std::vector<std::string>;
@@ -21,7 +21,7 @@ using Lines = std::vector<std::string>;
 class SyntheticCDHash : public testing::Test {
   protected:
     SyntheticCDHash() {
-        test::writeFile(platform.directory / "image.dmg", foundation::ByteView(DiskImageBuilder().build()));
+        test::writeFile(platform.directory / "image.dmg", base::ByteView(DiskImageBuilder().build()));
         platform.codeSigning.detachedInformation.emplace();
         platform.codeSigning.detachedInformation->cdHashes = {Data(20, std::byte{0xCD}), Data(20)};
         platform.codeSigning.detachedInformation->digestAlgorithms = {2, 1};
@@ -75,7 +75,7 @@ TEST_F(SyntheticCDHash, WithoutAnyPlaceForAResultIsAParameterErrorThatChangesNot
 }
 
 TEST_F(SyntheticCDHash, CanBeRequestedWithoutItsAlgorithmAndViceVersa) {
-    const foundation::URL image = platform.directory.url("image.dmg");
+    const values::URL image = platform.directory.url("image.dmg");
     EXPECT_EQ(syntheticCDHashForURL(image, platform.services(), nullptr, &hash), kSuccess);
     EXPECT_EQ(hash, Data(20, std::byte{0xCD}));
     EXPECT_EQ(syntheticCDHashForURL(image, platform.services(), &algorithm, nullptr), kSuccess);
@@ -179,16 +179,15 @@ TEST_F(RealSyntheticCDHash, IsTheSameEachTimeAndLeavesTheFileAlone) {
     EXPECT_EQ(first->size(), 20U);
     EXPECT_EQ(algorithm, 2U);
     EXPECT_EQ(hashOf("image.dmg"), first);
-    EXPECT_EQ(test::readFile(platform.directory / "image.dmg"),
-              foundation::toString(DiskImageBuilder().build()));
+    EXPECT_EQ(test::readFile(platform.directory / "image.dmg"), base::toString(DiskImageBuilder().build()));
 }
 
 TEST_F(RealSyntheticCDHash, DependsOnDataAndTrailer) {
     const Data otherData = DiskImageBuilder().data(Data(1000, std::byte{0xDB})).build();
     Data otherTrailer = DiskImageBuilder().build();
     otherTrailer.back() ^= std::byte{1};
-    test::writeFile(platform.directory / "data.dmg", foundation::ByteView(otherData));
-    test::writeFile(platform.directory / "trailer.dmg", foundation::ByteView(otherTrailer));
+    test::writeFile(platform.directory / "data.dmg", base::ByteView(otherData));
+    test::writeFile(platform.directory / "trailer.dmg", base::ByteView(otherTrailer));
     EXPECT_NE(hashOf("data.dmg"), hashOf("image.dmg"));
     EXPECT_NE(hashOf("trailer.dmg"), hashOf("image.dmg"));
 }

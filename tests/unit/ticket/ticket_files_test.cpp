@@ -12,7 +12,7 @@
 namespace pinwell::test {
 namespace {
 
-using foundation::asBytes;
+using base::asBytes;
 using ticket_files::Index;
 using ticket_files::IndexEntry;
 using ticket_files::replaceFile;

@@ -12,7 +12,7 @@
 namespace pinwell::trust {
 namespace {
 
-using foundation::asBytes;
+using base::asBytes;
 
 const test::IssuedChain& chain() {
     static const test::IssuedChain issued = test::TicketChain().issue();
@@ -73,7 +73,7 @@ struct Loaded {
 
 Loaded loadFrom(const test::TemporaryDirectory& directory) {
     Loaded loaded;
-    loaded.anchors = loadAnchors(foundation::PlatformDirectory(directory.path()),
+    loaded.anchors = loadAnchors(config::PlatformDirectory(directory.path()),
                                  [&](std::string_view line) { loaded.log.emplace_back(line); });
     return loaded;
 }
@@ -238,7 +238,7 @@ TEST(DenyFile, HasNoLimitOnItsCertificates) {
 TEST(DenyFile, MayHoldTrustedCertificatesOfOpenssl) {
     const test::TemporaryDirectory directory;
     Data trusted = chain().leaf.der;
-    foundation::append(trusted, Data{std::byte{0x30}, std::byte{0}});
+    base::append(trusted, Data{std::byte{0x30}, std::byte{0}});
     test::writeFile(directory / "user-trust/deny/a.pem", test::toPem("TRUSTED CERTIFICATE", trusted));
     EXPECT_TRUE(loadFrom(directory).anchors.denied.reaches(*X509Certificate::parse(chain().leaf.der)));
 }
@@ -269,7 +269,7 @@ TEST(AnchorList, ContainsACertificateByteForByte) {
     EXPECT_FALSE(contains(list, *X509Certificate::parse(other)));
 }
 
-using foundation::toData;
+using base::toData;
 
 const std::string kOne = "-----BEGIN ONE-----\nAQID\n-----END ONE-----\n";
 

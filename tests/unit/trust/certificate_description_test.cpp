@@ -62,7 +62,7 @@ TEST(CertificateDescription, ListsEveryExtensionAndMarksTheMalformed) {
     CertificateFields fields;
     fields.markers = {test::kTicketLeafMarker};
     fields.extensions = {{.oid = "1.2.3.4", .critical = true},
-                         {.oid = "2.5.29.15", .value = foundation::toData("?")}};
+                         {.oid = "2.5.29.15", .value = base::toData("?")}};
     const CertificateDescription description = describe(issueCertificate(fields, nullptr));
     using Extension = CertificateDescription::Extension;
     EXPECT_THAT(description.extensions, Contains(Field(&Extension::oid, test::kTicketLeafMarker)));
@@ -90,7 +90,7 @@ TEST(CertificateDescription, GivesDatesSerialNumberAndFingerprints) {
 }
 
 TEST(CertificateDescription, DescribesNothingThatIsNoCertificate) {
-    foundation::Data der = test::TicketChain().issue().leaf.der;
+    base::Data der = test::TicketChain().issue().leaf.der;
     EXPECT_TRUE(describeCertificate(der));
     der.push_back(std::byte{0});
     EXPECT_FALSE(describeCertificate(der));

@@ -2,8 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include "base/byte_io.h"
 #include "elements.h"
-#include "foundation/byte_writer.h"
 #include "support/certificate_builder.h"
 
 namespace pinwell::trust {
@@ -33,7 +33,7 @@ TEST(Certificate, IsRefusedWhenCutShortOrFollowedByMore) {
 TEST(Certificate, IsRefusedWithAnIndefiniteLength) {
     Data der = issueCertificate({}, nullptr).der;
     Data indefinite{std::byte{0x30}, std::byte{0x80}};
-    foundation::append(indefinite, ByteView(der).subspan(4));
+    base::append(indefinite, ByteView(der).subspan(4));
     indefinite.resize(indefinite.size() + 2);
     EXPECT_EQ(X509Certificate::parse(indefinite), nullptr);
 }
@@ -127,13 +127,13 @@ TEST(Certificate, KeepsDatesBeyondTheTwoDigitYears) {
 // The grammar of a certificate's bytes. Each row is a certificate with one change under a valid signature;
 // every rule here is our own, not a library's.
 
-using foundation::asBytes;
-using foundation::ByteWriter;
+using base::asBytes;
+using base::ByteWriter;
 using test::CertificateElements;
 
 /// The contents of one element.
 Data inside(const Data& element) {
-    return foundation::toData(der::readElement(element)->contents);
+    return base::toData(der::readElement(element)->contents);
 }
 
 /// The same element around other contents.
@@ -284,9 +284,9 @@ INSTANTIATE_TEST_SUITE_P(OfNames, Grammar, testing::Values(
     GrammarRow{"AnAttributeWithoutAValue", false, [](Elements& e) { e.subject = derElement(0x30, derElement(0x31, derElement(0x30, bytes({6, 3, 0x55, 4, 3})))); }},
     GrammarRow{"AnAttributeOfTwoValues", false, [](Elements& e) { e.subject = derElement(0x30, derElement(0x31, derElement(0x30, bytes({6, 3, 0x55, 4, 3, 5, 0, 5, 0})))); }},
     GrammarRow{"AnAttributeOfNoType", false, [](Elements& e) { e.subject = derElement(0x30, derElement(0x31, derElement(0x30, bytes({6, 0, 5, 0})))); }},
-    GrammarRow{"OfTheMostAttributes", true, [](Elements& e) { Data all; for (std::size_t i = 0; i < kMaximumNameAttributes; ++i) foundation::append(all, inside(nameOf(12, "x"))); e.subject = derElement(0x30, all); }},
-    GrammarRow{"OfTooManyAttributes", false, [](Elements& e) { Data all; for (std::size_t i = 0; i <= kMaximumNameAttributes; ++i) foundation::append(all, inside(nameOf(12, "x"))); e.subject = derElement(0x30, all); }},
-    GrammarRow{"OfTooManyAttributesInOneSet", false, [](Elements& e) { Data all; for (std::size_t i = 0; i <= kMaximumNameAttributes; ++i) foundation::append(all, inside(inside(nameOf(12, "x")))); e.issuer = derElement(0x30, derElement(0x31, all)); }}),
+    GrammarRow{"OfTheMostAttributes", true, [](Elements& e) { Data all; for (std::size_t i = 0; i < kMaximumNameAttributes; ++i) base::append(all, inside(nameOf(12, "x"))); e.subject = derElement(0x30, all); }},
+    GrammarRow{"OfTooManyAttributes", false, [](Elements& e) { Data all; for (std::size_t i = 0; i <= kMaximumNameAttributes; ++i) base::append(all, inside(nameOf(12, "x"))); e.subject = derElement(0x30, all); }},
+    GrammarRow{"OfTooManyAttributesInOneSet", false, [](Elements& e) { Data all; for (std::size_t i = 0; i <= kMaximumNameAttributes; ++i) base::append(all, inside(inside(nameOf(12, "x")))); e.issuer = derElement(0x30, derElement(0x31, all)); }}),
     [](const auto& row) { return std::string(row.param.name); });
 
 INSTANTIATE_TEST_SUITE_P(OfTheKey, Grammar, testing::Values(
@@ -316,8 +316,8 @@ INSTANTIATE_TEST_SUITE_P(OfExtensions, Grammar, testing::Values(
     GrammarRow{"Twice", false, [](Elements& e) { e.extensions = joined({e.extensions, e.extensions}); }},
     GrammarRow{"AnIdentifierOfOneHundredAndTwentyEightBytes", true, [](Elements& e) { e.extensions = derElement(0xA3, derElement(0x30, derElement(0x30, joined({derElement(6, Data(128, std::byte{1})), kNullValue})))); }},
     GrammarRow{"AGiantIdentifier", false, [](Elements& e) { e.extensions = derElement(0xA3, derElement(0x30, derElement(0x30, joined({derElement(6, Data(100000, std::byte{1})), kNullValue})))); }},
-    GrammarRow{"AsManyAsThereMayBe", true, [](Elements& e) { Data all; for (std::size_t i = 0; i < kMaximumExtensions; ++i) foundation::append(all, inside(inside(extensionsOf(kNullValue)))); e.extensions = derElement(0xA3, derElement(0x30, all)); }},
-    GrammarRow{"TooMany", false, [](Elements& e) { Data all; for (std::size_t i = 0; i <= kMaximumExtensions; ++i) foundation::append(all, inside(inside(extensionsOf(kNullValue)))); e.extensions = derElement(0xA3, derElement(0x30, all)); }}),
+    GrammarRow{"AsManyAsThereMayBe", true, [](Elements& e) { Data all; for (std::size_t i = 0; i < kMaximumExtensions; ++i) base::append(all, inside(inside(extensionsOf(kNullValue)))); e.extensions = derElement(0xA3, derElement(0x30, all)); }},
+    GrammarRow{"TooMany", false, [](Elements& e) { Data all; for (std::size_t i = 0; i <= kMaximumExtensions; ++i) base::append(all, inside(inside(extensionsOf(kNullValue)))); e.extensions = derElement(0xA3, derElement(0x30, all)); }}),
     [](const auto& row) { return std::string(row.param.name); });
 // clang-format on
 

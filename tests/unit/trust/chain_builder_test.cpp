@@ -223,7 +223,7 @@ TEST_P(ExhaustedSearch, ReportsTheBoundAsTheOnlyCause) {
     EXPECT_TRUE(trust->failureDescription().value_or("").ends_with(kGivenUp))
         << trust->failureDescription().value_or("");
     ASSERT_EQ(trust->properties().size(), 1U);
-    EXPECT_EQ(trust->properties()[0]["error"], foundation::Value(kGivenUp));
+    EXPECT_EQ(trust->properties()[0]["error"], values::Value(kGivenUp));
 }
 
 TEST_P(ExhaustedSearch, FindsALeafThatIsDistrustedAllTheSame) {

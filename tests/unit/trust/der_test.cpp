@@ -9,9 +9,9 @@
 namespace pinwell::trust::der {
 namespace {
 
-using foundation::asBytes;
-using foundation::Data;
-using foundation::toData;
+using base::asBytes;
+using base::Data;
+using base::toData;
 using namespace std::string_literals;
 
 std::optional<Element> element(const Data& data) {
@@ -78,7 +78,7 @@ TEST(DerElement, RefusesAnElementCutAtEveryByte) {
     data.resize(4 + 128);
     ASSERT_TRUE(element(data));
     for (std::size_t length = 0; length < data.size(); ++length) {
-        EXPECT_FALSE(readElement(foundation::ByteView(data).first(length))) << length;
+        EXPECT_FALSE(readElement(base::ByteView(data).first(length))) << length;
     }
 }
 
@@ -121,8 +121,8 @@ TEST(DerNesting, EndsAtItsLimit) {
     EXPECT_FALSE(isNestedDefinite(bytes({0x30, 0x02, 0x30, 0x00}), 1));
 }
 
-using foundation::ByteView;
-using foundation::Date;
+using base::ByteView;
+using values::Date;
 
 bool isInteger(const Data& contents) {
     try {

@@ -7,8 +7,8 @@
 namespace pinwell::trust {
 namespace {
 
-using foundation::asBytes;
-using foundation::Data;
+using base::asBytes;
+using base::Data;
 
 constexpr std::uint8_t kUtf8 = 12;
 constexpr std::uint8_t kPrintable = 19;
@@ -21,7 +21,7 @@ constexpr std::string_view kCommonName("\x06\x03\x55\x04\x03", 5);
 constexpr std::string_view kOrganization("\x06\x03\x55\x04\x0A", 5);
 
 Data attribute(std::string_view type, std::uint8_t tag, std::string_view text) {
-    return derElement(0x30, joined({foundation::toData(type), derElement(tag, asBytes(text))}));
+    return derElement(0x30, joined({base::toData(type), derElement(tag, asBytes(text))}));
 }
 
 Data part(const std::vector<Data>& attributes) {

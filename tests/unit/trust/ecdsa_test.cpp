@@ -2,7 +2,7 @@
 
 #include <gtest/gtest.h>
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 #include "published_signatures.h"
 #include "support/certificate_builder.h"
 #include "trust/certificate.h"
@@ -10,8 +10,8 @@
 namespace pinwell::trust {
 namespace {
 
-using foundation::asBytes;
-using foundation::ByteWriter;
+using base::asBytes;
+using base::ByteWriter;
 using test::KeyKind;
 using test::SigningKey;
 

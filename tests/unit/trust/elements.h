@@ -4,20 +4,20 @@
 #include <initializer_list>
 #include <vector>
 
-#include "foundation/bytes.h"
+#include "base/bytes.h"
 #include "support/ticket_builder.h"
 
 namespace pinwell::trust {
 
-inline foundation::Data bytes(std::initializer_list<unsigned> values) {
-    foundation::Data data;
+inline base::Data bytes(std::initializer_list<unsigned> values) {
+    base::Data data;
     for (const unsigned value : values) data.push_back(static_cast<std::byte>(value));
     return data;
 }
 
-inline foundation::Data joined(const std::vector<foundation::Data>& parts) {
-    foundation::Data all;
-    for (const foundation::Data& part : parts) foundation::append(all, part);
+inline base::Data joined(const std::vector<base::Data>& parts) {
+    base::Data all;
+    for (const base::Data& part : parts) base::append(all, part);
     return all;
 }
 

@@ -10,12 +10,12 @@
 namespace pinwell::trust {
 namespace {
 
-using foundation::Data;
+using base::Data;
 using testing::ElementsAre;
 using testing::IsEmpty;
 
 void append(Data& all, const Data& more) {
-    foundation::append(all, more);
+    base::append(all, more);
 }
 
 /// Of the last arc of 2.5.29.

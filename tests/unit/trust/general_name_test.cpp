@@ -7,7 +7,7 @@
 namespace pinwell::trust {
 namespace {
 
-using foundation::Data;
+using base::Data;
 
 struct HostRow {
     const char* title;

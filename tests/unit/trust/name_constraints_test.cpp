@@ -8,7 +8,7 @@
 namespace pinwell::trust {
 namespace {
 
-using foundation::Data;
+using base::Data;
 
 NameConstraints permitted(std::vector<std::string> names) {
     NameConstraints constraints;

@@ -12,7 +12,7 @@
 namespace pinwell::trust {
 namespace {
 
-using foundation::Data;
+using base::Data;
 using test::CertificateElements;
 using test::CertificateFields;
 using test::KeyKind;
@@ -71,7 +71,7 @@ TEST(UsableKey, MayBeOnAnyCurveOfTheTable) {
         const auto verifier = read(key.publicKeyInfo());
         ASSERT_NE(verifier, nullptr) << name;
         EXPECT_EQ(verifier->curve(), name);
-        const Data message = foundation::toData("message");
+        const Data message = base::toData("message");
         EXPECT_TRUE(verifier->verifies({"", SignatureAlgorithm::Scheme::ecdsa, {"SHA256", true}, {}}, message,
                                        key.sign(message)))
             << name;
@@ -83,7 +83,7 @@ TEST(CompressedPoint, IsTheSameKey) {
         const SigningKey key = SigningKey::cached(KeyKind::p256, name);
         const auto compressed = read(test::compressedPoint(key.publicKeyInfo()));
         ASSERT_NE(compressed, nullptr);
-        const Data message = foundation::toData("message");
+        const Data message = base::toData("message");
         EXPECT_TRUE(compressed->verifies({"", SignatureAlgorithm::Scheme::ecdsa, {"SHA256", true}, {}},
                                          message, key.sign(message)));
     }
@@ -103,10 +103,9 @@ TEST_P(UnusableKey, IsNone) {
 /// The key of P-256 with other bytes for its point.
 Data withPoint(const Data& point) {
     Data bits = bytes({0});
-    foundation::append(bits, point);
-    Data contents =
-        foundation::toData(der::readElement(der::readElement(keyInfo(KeyKind::p256))->contents)->whole);
-    foundation::append(contents, derElement(3, bits));
+    base::append(bits, point);
+    Data contents = base::toData(der::readElement(der::readElement(keyInfo(KeyKind::p256))->contents)->whole);
+    base::append(contents, derElement(3, bits));
     return derElement(0x30, contents);
 }
 
@@ -219,7 +218,7 @@ INSTANTIATE_TEST_SUITE_P(
                  [] {
                      Data bits(32);
                      Data contents = algorithm(bytes({6, 3, 0x2B, 0x65, 0x70}));
-                     foundation::append(contents, derElement(3, bits));
+                     base::append(contents, derElement(3, bits));
                      return derElement(0x30, contents);
                  }},
         Unusable{"Dsa",
@@ -449,7 +448,7 @@ INSTANTIATE_TEST_SUITE_P(
 TEST(CertificateSignature, IsRefusedWithAByteAfterIt) {
     for (const SigningKey* key : {&kEc, &kRsa}) {
         const auto unchanged = selfSigned(*key);
-        Data longer = foundation::toData(unchanged->parts().signature);
+        Data longer = base::toData(unchanged->parts().signature);
         longer.push_back(std::byte{0});
         const auto changed = selfSigned(*key, [&](CertificateFields& fields) {
             fields.edit = [&](CertificateElements& all) { all.signature = bitString(longer); };

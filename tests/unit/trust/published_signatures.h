@@ -4,7 +4,7 @@
 #include <string>
 #include <string_view>
 
-#include "foundation/byte_writer.h"
+#include "base/byte_io.h"
 #include "trust/certificate.h"
 
 namespace pinwell::trust {
@@ -32,7 +32,7 @@ inline constexpr std::string_view kTestS = "019F4113742A2B14BD25926B49C649155F26
 inline constexpr std::string_view kOrder = "FFFFFFFF00000000FFFFFFFFFFFFFFFFBCE6FAADA7179E84F3B9CAC2FC632551";
 
 inline X509PublicKey sampleKey() {
-    const Data info = foundation::ByteWriter()
+    const Data info = base::ByteWriter()
                           .bytes(fromHex("3059301306072A8648CE3D020106082A8648CE3D03010703420004"))
                           .bytes(fromHex(kPublicX))
                           .bytes(fromHex(kPublicY))
@@ -41,11 +41,7 @@ inline X509PublicKey sampleKey() {
 }
 
 inline Data element(std::uint8_t tag, const Data& contents) {
-    return foundation::ByteWriter()
-        .u8(tag)
-        .u8(static_cast<std::uint8_t>(contents.size()))
-        .bytes(contents)
-        .data();
+    return base::ByteWriter().u8(tag).u8(static_cast<std::uint8_t>(contents.size())).bytes(contents).data();
 }
 inline Data integer(std::string_view hex) {
     return element(0x02, fromHex(hex));
@@ -54,7 +50,7 @@ inline Data positive(std::string_view hex) {
     return integer((hex[0] >= '8' ? "00" : "") + std::string(hex));
 }
 inline Data sequence(const Data& first, const Data& second, const Data& behind = {}) {
-    return element(0x30, foundation::ByteWriter().bytes(first).bytes(second).bytes(behind).data());
+    return element(0x30, base::ByteWriter().bytes(first).bytes(second).bytes(behind).data());
 }
 inline Data padded(Data signature, std::size_t size = kField) {
     signature.resize(size);

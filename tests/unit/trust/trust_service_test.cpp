@@ -72,14 +72,14 @@ TEST(Trust, VerifiesSignaturesWithItsLeafsKey) {
     const auto trust = scene.trust(ticketPolicy());
     EXPECT_TRUE(trust->evaluate());
     ASSERT_NE(trust->publicKey(), nullptr);
-    const auto message = foundation::asBytes("message");
+    const auto message = base::asBytes("message");
     Data field = scene.chain.leaf.key.sign(message);
     field.resize(72);
     const PublicKeyRef key = trust->publicKey();
     EXPECT_TRUE(scene.service()->verifySignature(*key, message, field));
-    const auto refused = scene.service()->verifySignature(*key, foundation::asBytes("other"), field);
+    const auto refused = scene.service()->verifySignature(*key, base::asBytes("other"), field);
     ASSERT_FALSE(refused);
-    EXPECT_EQ(refused.error().domain(), foundation::kOSStatusErrorDomain);
+    EXPECT_EQ(refused.error().domain(), base::kOSStatusErrorDomain);
     EXPECT_EQ(refused.error().code(), kSignatureError);
 }
 
@@ -100,7 +100,7 @@ TEST(TrustCreation, RefusesListsThatAreEmptyTooLongOrForeign) {
 struct BadOption {
     const char* title;
     std::string_view key;
-    foundation::Value value;
+    values::Value value;
 };
 
 class UnjudgeablePolicy : public testing::TestWithParam<BadOption> {};

@@ -70,7 +70,7 @@ class ArchiveTest : public testing::Test {
             EXPECT_EQ(bytes, nullptr);
             return std::nullopt;
         }
-        const Data copy = foundation::toData(std::as_bytes(std::span(bytes, length)));
+        const Data copy = base::toData(std::as_bytes(std::span(bytes, length)));
         std::free(bytes);
         return copy;
     }

@@ -73,7 +73,7 @@ TEST_F(ArchiveHeader, Algorithm3IsNamedAfterByte28) {
 TEST_F(ArchiveHeader, ANameThatIsNoDigestIsRefused) {
     for (const char* name : {"none", "None", "sha3", "sha256x", "sha25", "SHA256", "Sha256"})
         EXPECT_FALSE(opens(ArchiveBuilder().namedDigest("sha256").headerTail([&] {
-            Data tail = foundation::toData(name);
+            Data tail = base::toData(name);
             tail.resize(12);
             return tail;
         }())))
@@ -82,12 +82,12 @@ TEST_F(ArchiveHeader, ANameThatIsNoDigestIsRefused) {
 }
 
 TEST_F(ArchiveHeader, ANameWithoutAnEndIsRefused) {
-    EXPECT_FALSE(opens(ArchiveBuilder().namedDigest("sha1").headerTail(foundation::toData("sha1"))));
+    EXPECT_FALSE(opens(ArchiveBuilder().namedDigest("sha1").headerTail(base::toData("sha1"))));
 }
 
 TEST_F(ArchiveHeader, WithANameIsAtLeast32BytesAndAMultipleOf4) {
     const auto withTail = [](std::size_t length) {
-        Data tail = foundation::toData("md5");
+        Data tail = base::toData("md5");
         tail.resize(length);
         return ArchiveBuilder().namedDigest("md5").headerTail(tail);
     };

@@ -72,7 +72,7 @@ TEST_F(ArchiveOpening, PrintsNothingWhateverIsWrong) {
     opensWithToc("<x:xar><toc/></x:xar>");
     opensWithToc("<xar><toc>&undeclared;</toc></xar>");
     opensWithToc("");
-    opens(ArchiveBuilder().compressedToc(foundation::toData("no stream")));
+    opens(ArchiveBuilder().compressedToc(base::toData("no stream")));
     opens(ArchiveBuilder().algorithm(77));
     EXPECT_EQ(testing::internal::GetCapturedStderr(), "");
     EXPECT_EQ(output.text(), "");
@@ -106,7 +106,7 @@ TEST_F(ArchiveOpening, ReadsNothingAfterTheChecksum) {
 
 TEST_F(ArchiveOpening, OfAnEmptyOrMalformedStreamIsRefused) {
     EXPECT_FALSE(opens(ArchiveBuilder().compressedToc({})));
-    EXPECT_FALSE(opens(ArchiveBuilder().compressedToc(foundation::toData("<xar><toc/></xar>"))));
+    EXPECT_FALSE(opens(ArchiveBuilder().compressedToc(base::toData("<xar><toc/></xar>"))));
     Data raw = deflated(tocWith(""));
     raw.erase(raw.begin(), raw.begin() + 2);  // the zlib header
     EXPECT_FALSE(opens(ArchiveBuilder().compressedToc(raw)));

@@ -105,7 +105,7 @@ TEST_F(ArchiveSignatures, AllSignTheSame) {
     std::uint32_t length = 0;
     const auto second = xar_signature_next(xar_signature_first(archive.get()));
     ASSERT_EQ(xar_signature_copy_signed_data(second, &bytes, &length, nullptr, nullptr, nullptr), 0);
-    EXPECT_EQ(foundation::toData(std::as_bytes(std::span(bytes, length))), builder.rightChecksum());
+    EXPECT_EQ(base::toData(std::as_bytes(std::span(bytes, length))), builder.rightChecksum());
     std::free(bytes);
 }
 
