@@ -105,14 +105,14 @@ void UDIFFileHeader::setCodeSign(std::uint64_t offset, std::uint64_t length) {
     std::copy(fields.begin(), fields.end(), bytes_.begin() + kUDIFCodeSignFieldsOffset);
 }
 
-bool disk_image_signature::refuse(std::uint64_t offset, const char* rule) {
+bool DiskImageSignature::refuse(std::uint64_t offset, const char* rule) {
     fault = {offset, rule};
     return false;
 }
 
 // A read error is only reported here: the zeros instead of the bytes fail the next check, with its own
 // message.
-bool readDiskImageTrailer(files::FileReader& file, const std::string& name, disk_image_signature& into,
+bool readDiskImageTrailer(files::FileReader& file, const std::string& name, DiskImageSignature& into,
                           const Diagnostics& diagnostics) {
     attempt([&] { into.fileSize = file.seekToEnd(); },
             [&](const char* reason) {
@@ -146,7 +146,7 @@ bool readDiskImageTrailer(files::FileReader& file, const std::string& name, disk
     return true;
 }
 
-bool readDiskImageSuperblob(files::FileReader& file, const std::string& name, disk_image_signature& into,
+bool readDiskImageSuperblob(files::FileReader& file, const std::string& name, DiskImageSignature& into,
                             const Diagnostics& diagnostics) {
     diagnostics.note("Codesign offset 0x%llx length: %llu", into.csStart, into.csLength);
     const std::uint64_t trailerStart = into.fileSize - kUDIFHeaderSize;
@@ -175,7 +175,7 @@ bool readDiskImageSuperblob(files::FileReader& file, const std::string& name, di
     return into.superblob.size() == wanted || into.refuse(into.csStart, "the signature cannot be read");
 }
 
-bool readDiskImageBlobs(const std::string& name, disk_image_signature& into, const Diagnostics& diagnostics) {
+bool readDiskImageBlobs(const std::string& name, DiskImageSignature& into, const Diagnostics& diagnostics) {
     std::array<std::byte, kSuperblobHeaderSize> header{};  // for a shorter superblob the rest is zero
     const ByteView start = into.superblob.view().first(std::min(into.superblob.size(), header.size()));
     std::copy(start.begin(), start.end(), header.begin());

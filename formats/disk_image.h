@@ -86,7 +86,7 @@ class UDIFFileHeader {
 
 /// The steps below fill it, in their order. Offsets and lengths are in bytes, offsets from the start of the
 /// file.
-struct disk_image_signature {
+struct DiskImageSignature {
     UDIFFileHeader trailer;
     std::uint64_t fileSize = 0;
     std::uint64_t csStart = 0;
@@ -96,7 +96,7 @@ struct disk_image_signature {
     BlobSet blobs;               // views of the superblob
 
     /// Why these are not valid, with the offset in the file.
-    std::optional<ticket_fault> fault;
+    std::optional<TicketFault> fault;
 
     /// As the trailer says; an unsigned image has no superblob.
     bool isSigned() const noexcept { return csStart != 0 && csLength != 0; }
@@ -109,16 +109,16 @@ struct disk_image_signature {
 // `fault`, and a diagnostic line. No step throws.
 
 /// Reads the trailer: the kind of the file, and the superblob's place. `name` is for the diagnostics.
-bool readDiskImageTrailer(files::FileReader& file, const std::string& name, disk_image_signature& into,
+bool readDiskImageTrailer(files::FileReader& file, const std::string& name, DiskImageSignature& into,
                           const Diagnostics& diagnostics = {});
 
 /// Reads the whole superblob of a signed image. Holes and zeros take no memory. If it is too long for its own
 /// length field, only its header is read, and the superblob is refused.
-bool readDiskImageSuperblob(files::FileReader& file, const std::string& name, disk_image_signature& into,
+bool readDiskImageSuperblob(files::FileReader& file, const std::string& name, DiskImageSignature& into,
                             const Diagnostics& diagnostics = {});
 
 /// Splits the superblob.
-bool readDiskImageBlobs(const std::string& name, disk_image_signature& into,
+bool readDiskImageBlobs(const std::string& name, DiskImageSignature& into,
                         const Diagnostics& diagnostics = {});
 
 /// The blob of the stapled ticket: the last one in its slot; null if there is none.

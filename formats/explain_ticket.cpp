@@ -35,7 +35,7 @@ class Explanation {
         found_.reason = std::move(reason);
         return false;
     }
-    bool refuse(RefusalStep step, std::uint64_t base, const ticket_fault& fault) {
+    bool refuse(RefusalStep step, std::uint64_t base, const TicketFault& fault) {
         return refuse(step, base + fault.offset, fault.rule);
     }
     std::uint64_t offsetOf(const std::byte* part) const {
@@ -43,14 +43,14 @@ class Explanation {
     }
 
     bool readFrame() {
-        const satchel_survey frame = satchel_survey_container(ticket_);
+        const SatchelSurvey frame = surveySatchelContainer(ticket_);
         view_ = frame.view;
         return !frame.fault || refuse(RefusalStep::container, 0, *frame.fault);
     }
 
     bool readCertificates() {
-        const ByteView block(view_.certificates, view_.certificates_length);
-        block_ = satchel_survey_certificates(block);
+        const ByteView block(view_.certificates, view_.certificatesLength);
+        block_ = surveySatchelCertificates(block);
         const auto fault = explainCertificates(block, block_, service_, &certificates_);
         return !fault || refuse(fault->step, offsetOf(block.data()) + fault->offset, fault->reason);
     }
@@ -67,18 +67,17 @@ class Explanation {
 
     bool checkSignature() {
         const trust::PublicKeyRef key = trust_->publicKey();
-        const bool verifies =
-            key != nullptr &&
-            _satchel_validate_signature(*key, ByteView(view_.signed_data, view_.signed_data_length),
-                                        ByteView(view_.signature, view_.signature_length),
-                                        service_) == satchel_status::kSuccess;
+        const bool verifies = key != nullptr && _satchel_validate_signature(
+                                                    *key, ByteView(view_.signedData, view_.signedDataLength),
+                                                    ByteView(view_.signature, view_.signatureLength),
+                                                    service_) == satchel_status::kSuccess;
         return verifies ||
                refuse(RefusalStep::signature, offsetOf(view_.signature), "the signature does not verify");
     }
 
     bool readPayload() {
-        const ByteView payload(view_.payload, view_.payload_length);
-        const tm_ticket_survey survey = tm_ticket_survey_payload(payload);
+        const ByteView payload(view_.payload, view_.payloadLength);
+        const TicketSurvey survey = surveyTicketPayload(payload);
         return !survey.fault || refuse(RefusalStep::payload, offsetOf(payload.data()), *survey.fault);
     }
 
@@ -86,21 +85,21 @@ class Explanation {
     trust::TrustService& service_;
     TicketRefusal found_;
     satchel_view view_;
-    satchel_certificate_block block_;
+    SatchelCertificateBlock block_;
     std::vector<trust::CertificateRef> certificates_;
     std::shared_ptr<trust::Trust> trust_;
 };
 
-tm_ticket_ptr genuineTicket(ByteView ticket, trust::TrustService& service) {
+TicketPointer genuineTicket(ByteView ticket, trust::TrustService& service) {
     tm_ticket* decoded = nullptr;
     if (satchel_get_validated_tm_ticket(ticket.data(), ticket.size(), &decoded, service) != kAccepted)
         return nullptr;
-    return tm_ticket_ptr(decoded);
+    return TicketPointer(decoded);
 }
 
 TicketRefusal genuineButRefused(RefusalStep step, ByteView ticket, std::uint64_t offsetInPayload,
                                 const char* reason) {
-    const std::byte* const payload = satchel_survey_container(ticket).view.payload;
+    const std::byte* const payload = surveySatchelContainer(ticket).view.payload;
     return {step, static_cast<std::uint64_t>(payload - ticket.data()) + offsetInPayload, reason,
             trust::Verdict::unspecified};
 }
@@ -117,7 +116,7 @@ TicketVerdict judgeWith(const std::optional<base::Data>& ticket, trust::TrustSer
     if (!ticket || ticket->empty()) return TicketVerdict::refused;
     if (ticket->size() > std::numeric_limits<std::uint32_t>::max()) return TicketVerdict::refused;
 
-    const tm_ticket_ptr genuine = genuineTicket(*ticket, trust);
+    const TicketPointer genuine = genuineTicket(*ticket, trust);
     if (genuine == nullptr) return TicketVerdict::refused;
     if ((tm_ticket_get_flags(genuine.get()) & kTicketRevoked) != 0) return TicketVerdict::revoked;
     return isListed(genuine.get()) ? TicketVerdict::acceptable : TicketVerdict::refused;
@@ -143,7 +142,7 @@ TicketVerdict judgeTicket(const std::optional<base::Data>& ticket,
                           trust::TrustService& trust) {
     return judgeWith(ticket, trust, [&](const tm_ticket* decoded) {
         const auto wanted = hash();
-        return wanted && tm_ticket_lists_cdhash(decoded, *wanted);
+        return wanted && ticketListsHash(decoded, *wanted);
     });
 }
 
@@ -157,18 +156,18 @@ TicketVerdict judgeTicket(const std::optional<base::Data>& ticket, const std::ve
     });
 }
 
-std::optional<TicketRefusal> explain_ticket(ByteView ticket, trust::TrustService& service) {
-    const tm_ticket_ptr genuine = genuineTicket(ticket, service);
+std::optional<TicketRefusal> explainTicket(ByteView ticket, trust::TrustService& service) {
+    const TicketPointer genuine = genuineTicket(ticket, service);
     return genuine == nullptr ? explainRefusedTicket(ticket, service) : explainRevoked(ticket, genuine.get());
 }
 
-std::optional<TicketRefusal> explain_ticket(ByteView ticket, const std::optional<base::Data>& cdhash,
-                                            trust::TrustService& service) {
-    const tm_ticket_ptr genuine = genuineTicket(ticket, service);
+std::optional<TicketRefusal> explainTicket(ByteView ticket, const std::optional<base::Data>& cdhash,
+                                           trust::TrustService& service) {
+    const TicketPointer genuine = genuineTicket(ticket, service);
     if (genuine == nullptr) return explainRefusedTicket(ticket, service);
     if (auto revoked = explainRevoked(ticket, genuine.get())) return revoked;
     if (!cdhash) return genuineButRefused(RefusalStep::listing, ticket, kTicketHeaderSize, kNothingToList);
-    if (!tm_ticket_lists_cdhash(genuine.get(), *cdhash))
+    if (!ticketListsHash(genuine.get(), *cdhash))
         return genuineButRefused(RefusalStep::listing, ticket, kTicketHeaderSize, kNotListed);
     return std::nullopt;
 }
@@ -177,7 +176,7 @@ TicketRefusal explainRefusedTicket(ByteView ticket, trust::TrustService& service
     return Explanation(ticket, service).run();
 }
 
-std::optional<TicketRefusal> explainCertificates(ByteView block, const satchel_certificate_block& survey,
+std::optional<TicketRefusal> explainCertificates(ByteView block, const SatchelCertificateBlock& survey,
                                                  trust::TrustService& service,
                                                  std::vector<trust::CertificateRef>* certificates) {
     for (std::size_t i = 0; i < survey.count; ++i) {
@@ -236,12 +235,12 @@ JudgedChain judgeTicketChain(const std::vector<trust::CertificateRef>& certifica
     return chain;
 }
 
-std::optional<TicketPlaceFault> placeFault(const std::optional<ticket_fault>& fault) {
+std::optional<TicketPlaceFault> placeFault(const std::optional<TicketFault>& fault) {
     if (!fault) return std::nullopt;
     return TicketPlaceFault{fault->rule, fault->offset};
 }
 
-std::optional<TicketPlaceFault> explainTicketPlace(const disk_image_signature& image) {
+std::optional<TicketPlaceFault> explainTicketPlace(const DiskImageSignature& image) {
     if (image.fault) return placeFault(image.fault);
     const BlobRecord* const blob = ticketBlobOf(image.blobs);
     if (blob == nullptr) return std::nullopt;
@@ -249,7 +248,7 @@ std::optional<TicketPlaceFault> explainTicketPlace(const disk_image_signature& i
     return placeFault(faultOfTicketLength(length, image.csStart + blob->offset + blob->length() - length));
 }
 
-std::optional<TicketPlaceFault> explainTicketPlace(const package_trailers& package) {
+std::optional<TicketPlaceFault> explainTicketPlace(const PackageTrailers& package) {
     if (package.fault) return placeFault(package.fault);
     return placeFault(faultOfTicketLength(package.ticketLength, package.ticketStart));
 }

@@ -71,12 +71,12 @@ struct TicketRefusal {
 
 /// Why a ticket is refused by itself: it is not genuine (satchel_get_validated_tm_ticket refuses it), or it
 /// is marked as revoked. `nullopt` if it is neither.
-std::optional<TicketRefusal> explain_ticket(base::ByteView ticket, trust::TrustService& service);
+std::optional<TicketRefusal> explainTicket(base::ByteView ticket, trust::TrustService& service);
 
 /// The same for the ticket of an artefact, which must list `cdhash` too. Pass `nullopt` for an artefact
 /// without a valid signature: every ticket is refused then.
-std::optional<TicketRefusal> explain_ticket(base::ByteView ticket, const std::optional<base::Data>& cdhash,
-                                            trust::TrustService& service);
+std::optional<TicketRefusal> explainTicket(base::ByteView ticket, const std::optional<base::Data>& cdhash,
+                                           trust::TrustService& service);
 
 /// The reason for a ticket that satchel_get_validated_tm_ticket has just refused. The step is `memory` if no
 /// rule is broken.
@@ -87,8 +87,7 @@ TicketRefusal explainRefusedTicket(base::ByteView ticket, trust::TrustService& s
 /// The first fault of a certificate block, whose survey is `survey`; `offset` counts from the start of
 /// `block`. A certificate that cannot be read comes before a fault of the framing after it. `certificates`,
 /// if not null, gets the certificates before the fault.
-std::optional<TicketRefusal> explainCertificates(base::ByteView block,
-                                                 const satchel_certificate_block& survey,
+std::optional<TicketRefusal> explainCertificates(base::ByteView block, const SatchelCertificateBlock& survey,
                                                  trust::TrustService& service,
                                                  std::vector<trust::CertificateRef>* certificates = nullptr);
 
@@ -134,10 +133,10 @@ struct TicketPlaceFault {
 };
 
 /// `fault` as the fault of a place.
-std::optional<TicketPlaceFault> placeFault(const std::optional<ticket_fault>& fault);
+std::optional<TicketPlaceFault> placeFault(const std::optional<TicketFault>& fault);
 
 /// The fault of a place that has been read; `nullopt` if it is sound, with a ticket or without.
-std::optional<TicketPlaceFault> explainTicketPlace(const disk_image_signature& image);
-std::optional<TicketPlaceFault> explainTicketPlace(const package_trailers& package);
+std::optional<TicketPlaceFault> explainTicketPlace(const DiskImageSignature& image);
+std::optional<TicketPlaceFault> explainTicketPlace(const PackageTrailers& package);
 
 }  // namespace pinwell

@@ -19,7 +19,7 @@ namespace pinwell {
 inline constexpr std::int32_t kAccepted = 0;
 inline constexpr std::int32_t kRefused = -1;
 
-struct ticket_fault {
+struct TicketFault {
     /// From the start of the examined bytes.
     std::uint64_t offset = 0;
 
@@ -27,7 +27,7 @@ struct ticket_fault {
     /// allocate.
     const char* rule = "";
 
-    friend bool operator==(const ticket_fault& a, const ticket_fault& b) {
+    friend bool operator==(const TicketFault& a, const TicketFault& b) {
         return a.offset == b.offset && std::string_view(a.rule) == b.rule;
     }
 };

@@ -100,24 +100,24 @@ bool trailer_is_terminator(std::uint64_t firstWord, std::uint64_t length, const 
     return true;
 }
 
-std::optional<ticket_fault> faultOfTrailer(const trailer_header& record, std::uint64_t recordOffset) {
+std::optional<TicketFault> faultOfTrailer(const trailer_header& record, std::uint64_t recordOffset) {
     const bool hasMagic = record.magic() == kTrailerMagic;
     const bool hasVersion = record.version() == kTrailerVersion;
     const bool hasKnownType = record.type() == kTerminatorTrailerType || record.type() == kTicketTrailerType;
     if (!hasMagic && !(hasVersion && hasKnownType)) return std::nullopt;
-    if (!hasVersion) return ticket_fault{recordOffset, "a trailer's version is not 1"};
-    if (!hasMagic) return ticket_fault{recordOffset, "a trailer does not begin with its magic, \"t8lr\""};
+    if (!hasVersion) return TicketFault{recordOffset, "a trailer's version is not 1"};
+    if (!hasMagic) return TicketFault{recordOffset, "a trailer does not begin with its magic, \"t8lr\""};
     if (record.length() > recordOffset)
-        return ticket_fault{recordOffset, "a trailer's data would begin before the file"};
+        return TicketFault{recordOffset, "a trailer's data would begin before the file"};
     return std::nullopt;
 }
 
 namespace {
 
 /// The trailer of the record at `recordOffset`; `nullopt` if the bytes do not look like a record.
-std::optional<surveyed_trailer> surveyTrailer(ByteView bytes, std::uint64_t recordOffset) {
+std::optional<SurveyedTrailer> surveyTrailer(ByteView bytes, std::uint64_t recordOffset) {
     if (bytes.size() != kTrailerSize) return std::nullopt;
-    surveyed_trailer found;
+    SurveyedTrailer found;
     found.recordOffset = recordOffset;
     std::copy(bytes.begin(), bytes.end(), found.record.bytes.begin());
     found.fault = faultOfTrailer(found.record, recordOffset);
@@ -213,7 +213,7 @@ class Walk {
          const Diagnostics& diagnostics)
         : file_(file), window_(file), name_(name), visit_(visit), diagnostics_(diagnostics) {}
 
-    package_trailers run() {
+    PackageTrailers run() {
         if (readSize()) readTrailers();
         return std::move(found_);
     }
@@ -257,7 +257,7 @@ class Walk {
         }
         const std::uint64_t recordOffset = position - kTrailerSize;
         const ByteView bytes = window_.readAt(recordOffset, kTrailerSize);
-        const std::optional<surveyed_trailer> trailer = surveyTrailer(bytes, recordOffset);
+        const std::optional<SurveyedTrailer> trailer = surveyTrailer(bytes, recordOffset);
         const bool isValid = trailer_data_is_valid(bytes, nullptr, diagnostics_);
         if (!trailer || !isValid) {
             // Without a fault these bytes are not a record: the archive's, in a package without trailers.
@@ -324,13 +324,13 @@ class Walk {
     const TrailerVisitor& visit_;
     const Diagnostics& diagnostics_;
     BackwardCollection unknown_;
-    package_trailers found_;
+    PackageTrailers found_;
 };
 
 }  // namespace
 
-package_trailer_survey surveyPackageTrailers(FileReader& file, const TrailerVisitor& visit) {
-    package_trailer_survey survey;
+PackageTrailerSurvey surveyPackageTrailers(FileReader& file, const TrailerVisitor& visit) {
+    PackageTrailerSurvey survey;
     TrailerWindow window(file);
     std::optional<std::uint64_t> position = file.seekToEnd();
     while (position && *position >= kTrailerSize) {
@@ -351,8 +351,8 @@ package_trailer_survey surveyPackageTrailers(FileReader& file, const TrailerVisi
     return survey;
 }
 
-package_trailers walkPackageTrailers(FileReader& file, const std::string& name, const TrailerVisitor& visit,
-                                     const Diagnostics& diagnostics) {
+PackageTrailers walkPackageTrailers(FileReader& file, const std::string& name, const TrailerVisitor& visit,
+                                    const Diagnostics& diagnostics) {
     return Walk(file, name, visit, diagnostics).run();
 }
 

@@ -73,10 +73,10 @@ bool trailer_is_terminator(std::uint64_t firstWord, std::uint64_t length,
 
 /// The fault of a damaged record at `recordOffset`; `nullopt` for a sound record. `nullopt` as well for bytes
 /// that do not look like a record: a record has the magic, or a known version and type.
-std::optional<ticket_fault> faultOfTrailer(const trailer_header& record, std::uint64_t recordOffset);
+std::optional<TicketFault> faultOfTrailer(const trailer_header& record, std::uint64_t recordOffset);
 
 /// One trailer of a chain, with its place in the file.
-struct surveyed_trailer {
+struct SurveyedTrailer {
     std::uint64_t recordOffset = 0;
     trailer_header record;
     bool isTerminator = false;
@@ -85,12 +85,12 @@ struct surveyed_trailer {
     std::optional<std::uint64_t> dataOffset;
 
     /// If the record is damaged.
-    std::optional<ticket_fault> fault;
+    std::optional<TicketFault> fault;
 };
-using TrailerVisitor = std::function<void(const surveyed_trailer& trailer)>;
+using TrailerVisitor = std::function<void(const SurveyedTrailer& trailer)>;
 
 /// The results of a walk that passes tickets and damaged records, to show them.
-struct package_trailer_survey {
+struct PackageTrailerSurvey {
     bool hasTerminator = false;
 
     /// The place of the first ticket from the end of the file, the only one that counts; `nullopt` if there
@@ -100,14 +100,14 @@ struct package_trailer_survey {
 
     /// The first fault after this ticket, or that the ticket is too long to be read. So it is the fault of
     /// walkPackageTrailers().
-    std::optional<ticket_fault> fault;
+    std::optional<TicketFault> fault;
 };
 
 /// Walks from the end of the file to the terminator, or to bytes that do not look like a record. `visit` gets
 /// each trailer on the way. Throws files::FileHandleError.
-package_trailer_survey surveyPackageTrailers(files::FileReader& file, const TrailerVisitor& visit);
+PackageTrailerSurvey surveyPackageTrailers(files::FileReader& file, const TrailerVisitor& visit);
 
-struct package_trailers {
+struct PackageTrailers {
     std::uint64_t fileSize = 0;
 
     /// There is a terminator, or a trailer of unknown type after the end of the walk.
@@ -126,7 +126,7 @@ struct package_trailers {
     std::optional<base::SharedBytes> dataToAppend;
 
     /// The fault that ended the walk, with its offset in the file.
-    std::optional<ticket_fault> fault;
+    std::optional<TicketFault> fault;
 };
 
 /// The tool's walk: from the end of the file to the first ticket or the terminator, whichever comes first.
@@ -137,7 +137,7 @@ struct package_trailers {
 ///
 /// `name` is for the diagnostics. `visit`, if given, gets every valid record, the terminator's and the
 /// ticket's too. A read error becomes a fault; throws nothing itself.
-package_trailers walkPackageTrailers(files::FileReader& file, const std::string& name,
-                                     const TrailerVisitor& visit = {}, const Diagnostics& diagnostics = {});
+PackageTrailers walkPackageTrailers(files::FileReader& file, const std::string& name,
+                                    const TrailerVisitor& visit = {}, const Diagnostics& diagnostics = {});
 
 }  // namespace pinwell

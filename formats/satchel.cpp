@@ -33,49 +33,49 @@ bool wrapsAddressSpace(const std::byte* start, std::uint64_t length) {
     return length > std::numeric_limits<std::uintptr_t>::max() - std::bit_cast<std::uintptr_t>(start);
 }
 
-std::optional<ticket_fault> findFault(ByteView container, const satchel_fields& header, bool magic) {
-    if (!magic) return ticket_fault{0, "the container does not begin with its magic, \"s8ch\""};
-    if (header.version != kSatchelVersion) return ticket_fault{4, "the container's version is not 1"};
-    if (header.payload_length == 0) return ticket_fault{12, "the payload's length is 0"};
+std::optional<TicketFault> findFault(ByteView container, const SatchelFields& header, bool magic) {
+    if (!magic) return TicketFault{0, "the container does not begin with its magic, \"s8ch\""};
+    if (header.version != kSatchelVersion) return TicketFault{4, "the container's version is not 1"};
+    if (header.payloadLength == 0) return TicketFault{12, "the payload's length is 0"};
     // Two 32-bit numbers and a small one: the sum fits 64 bits.
-    const std::uint64_t stated = kSatchelHeaderSize + std::uint64_t{header.certificates_length} +
-                                 header.payload_length + kSatchelSignatureSize;
+    const std::uint64_t stated = kSatchelHeaderSize + std::uint64_t{header.certificatesLength} +
+                                 header.payloadLength + kSatchelSignatureSize;
     if (stated != container.size())
-        return ticket_fault{8, "the lengths of the parts do not add up to the container's"};
+        return TicketFault{8, "the lengths of the parts do not add up to the container's"};
     return std::nullopt;
 }
 
 // The end of the certificate block if the lengths do not add up. The two lengths give two results, and the
 // block itself a third.
-std::uint64_t certificatesLengthIn(ByteView parts, const satchel_fields& header) {
+std::uint64_t certificatesLengthIn(ByteView parts, const SatchelFields& header) {
     const std::optional<der::Element> block = der::readElement(parts);
-    const std::uint64_t stated = header.certificates_length;
+    const std::uint64_t stated = header.certificatesLength;
     const std::uint64_t own = block ? block->whole.size() : stated;
-    const bool payloadFits = header.payload_length <= parts.size();
-    const std::uint64_t fromPayload = payloadFits ? parts.size() - header.payload_length : stated;
+    const bool payloadFits = header.payloadLength <= parts.size();
+    const std::uint64_t fromPayload = payloadFits ? parts.size() - header.payloadLength : stated;
     const std::uint64_t chosen = own == fromPayload ? fromPayload : (own == stated || !block ? stated : own);
     return std::min<std::uint64_t>(chosen, parts.size());
 }
 
-void locateParts(ByteView container, satchel_survey& survey) {
+void locateParts(ByteView container, SatchelSurvey& survey) {
     if (container.size() < kSatchelHeaderSize + kSatchelSignatureSize) return;
     const ByteView signedData = container.first(container.size() - kSatchelSignatureSize);
     const ByteView parts = signedData.subspan(kSatchelHeaderSize);
     const bool addsUp =
-        survey.header->certificates_length + std::uint64_t{survey.header->payload_length} == parts.size();
+        survey.header->certificatesLength + std::uint64_t{survey.header->payloadLength} == parts.size();
     const std::uint64_t certificatesLength =
-        addsUp ? survey.header->certificates_length : certificatesLengthIn(parts, *survey.header);
+        addsUp ? survey.header->certificatesLength : certificatesLengthIn(parts, *survey.header);
 
     const ByteView certificates = parts.first(certificatesLength);
     const ByteView payload = parts.subspan(certificatesLength);
     survey.view = {.certificates = certificates.data(),
-                   .certificates_length = certificates.size(),
+                   .certificatesLength = certificates.size(),
                    .payload = payload.data(),
-                   .payload_length = payload.size(),
+                   .payloadLength = payload.size(),
                    .signature = signedData.data() + signedData.size(),
-                   .signature_length = kSatchelSignatureSize,
-                   .signed_data = signedData.data(),
-                   .signed_data_length = signedData.size(),
+                   .signatureLength = kSatchelSignatureSize,
+                   .signedData = signedData.data(),
+                   .signedDataLength = signedData.size(),
                    .version = survey.header->version};
 }
 
@@ -119,14 +119,14 @@ trust::Status createLocalPolicy(trust::PolicyRef* policy) {
 }
 
 trust::Status verify(const satchel_view& view, trust::TrustService& service) {
-    const bool complete = view.signed_data != nullptr && view.signed_data_length != 0 &&
-                          view.signature != nullptr && view.signature_length != 0 &&
-                          view.certificates != nullptr && view.certificates_length != 0;
+    const bool complete = view.signedData != nullptr && view.signedDataLength != 0 &&
+                          view.signature != nullptr && view.signatureLength != 0 &&
+                          view.certificates != nullptr && view.certificatesLength != 0;
     if (!complete) return status::kNotAvailable;
 
     std::vector<trust::CertificateRef> certificates;
-    const ByteView block(view.certificates, view.certificates_length);
-    trust::Status result = _satchel_copy_certificates(block, &certificates, service);
+    const ByteView block(view.certificates, view.certificatesLength);
+    trust::Status result = readSatchelCertificates(block, &certificates, service);
     if (result != status::kSuccess) return result;
 
     trust::PolicyRef policy;
@@ -140,14 +140,14 @@ trust::Status verify(const satchel_view& view, trust::TrustService& service) {
     const trust::PublicKeyRef key = evaluated->publicKey();
     if (key == nullptr) return status::kNotAvailable;
 
-    return _satchel_validate_signature(*key, ByteView(view.signed_data, view.signed_data_length),
-                                       ByteView(view.signature, view.signature_length), service);
+    return _satchel_validate_signature(*key, ByteView(view.signedData, view.signedDataLength),
+                                       ByteView(view.signature, view.signatureLength), service);
 }
 
 }  // namespace
 
-satchel_survey satchel_survey_container(ByteView container) {
-    satchel_survey survey;
+SatchelSurvey surveySatchelContainer(ByteView container) {
+    SatchelSurvey survey;
     if (container.size() < kSatchelHeaderSize) {
         survey.fault = {container.size(), "the container ends inside its header"};
         return survey;
@@ -158,8 +158,8 @@ satchel_survey satchel_survey_container(ByteView container) {
     survey.header.emplace();
     survey.header->version = reader.le16("satchel version");
     survey.header->reserved = reader.le16("reserved");
-    survey.header->certificates_length = reader.le32("certificate block length");
-    survey.header->payload_length = reader.le32("payload length");
+    survey.header->certificatesLength = reader.le32("certificate block length");
+    survey.header->payloadLength = reader.le32("payload length");
 
     survey.fault = findFault(container, *survey.header, known);
     locateParts(container, survey);
@@ -170,38 +170,38 @@ std::int32_t satchel_decode_header(const std::byte* container, std::uint64_t len
     if (view == nullptr) return kRefused;
     *view = {};
     if (container == nullptr || wrapsAddressSpace(container, length)) return kRefused;
-    const satchel_survey survey = satchel_survey_container(ByteView(container, length));
+    const SatchelSurvey survey = surveySatchelContainer(ByteView(container, length));
     if (survey.fault) return kRefused;
     *view = survey.view;
     return kAccepted;
 }
 
 std::int32_t satchel_verify_signature(const satchel_view* view, trust::TrustService& service) {
-    return _satchel_verify(view, service) == status::kSuccess ? kAccepted : kRefused;
+    return verifySatchel(view, service) == status::kSuccess ? kAccepted : kRefused;
 }
 
 std::int32_t satchel_get_validated_payload(const std::byte* container, std::uint64_t length,
-                                           const std::byte** payload, std::uint64_t* payload_length,
+                                           const std::byte** payload, std::uint64_t* payloadLength,
                                            trust::TrustService& service) {
-    if (payload == nullptr || payload_length == nullptr) return kRefused;
+    if (payload == nullptr || payloadLength == nullptr) return kRefused;
     *payload = nullptr;
-    *payload_length = 0;
+    *payloadLength = 0;
 
     satchel_view view;
     if (satchel_decode_header(container, length, &view) != kAccepted) return kRefused;
     if (satchel_verify_signature(&view, service) != kAccepted) return kRefused;
     *payload = view.payload;
-    *payload_length = view.payload_length;
+    *payloadLength = view.payloadLength;
     return kAccepted;
 }
 
-trust::Status _satchel_verify(const satchel_view* view, trust::TrustService& service) {
+trust::Status verifySatchel(const satchel_view* view, trust::TrustService& service) {
     if (view == nullptr) return status::kBadParameter;
     return guardMemory([&] { return verify(*view, service); });
 }
 
-satchel_certificate_block satchel_survey_certificates(ByteView block) {
-    satchel_certificate_block survey;
+SatchelCertificateBlock surveySatchelCertificates(ByteView block) {
+    SatchelCertificateBlock survey;
     const std::optional<der::Element> sequence = der::readElement(block);
     if (!sequence) {
         survey.refuse(status::kNotAvailable, 0, "the certificate block is no DER element");
@@ -235,12 +235,12 @@ satchel_certificate_block satchel_survey_certificates(ByteView block) {
     return survey;
 }
 
-trust::Status _satchel_copy_certificates(ByteView block, std::vector<trust::CertificateRef>* certificates,
-                                         trust::TrustService& service) {
+trust::Status readSatchelCertificates(ByteView block, std::vector<trust::CertificateRef>* certificates,
+                                      trust::TrustService& service) {
     if (certificates == nullptr) return status::kBadParameter;
     certificates->clear();
 
-    const satchel_certificate_block survey = satchel_survey_certificates(block);
+    const SatchelCertificateBlock survey = surveySatchelCertificates(block);
     std::vector<trust::CertificateRef> found;
     found.reserve(kSatchelMaximumCertificates);
     for (const ByteView element : std::span(survey.elements).first(survey.count)) {
@@ -304,9 +304,9 @@ trust::Status _satchel_create_trust(const std::vector<trust::CertificateRef>& ce
     return status::kSuccess;
 }
 
-trust::Status _satchel_validate_signature(const trust::PublicKey& key, ByteView signed_data,
+trust::Status _satchel_validate_signature(const trust::PublicKey& key, ByteView signedData,
                                           ByteView signature, trust::TrustService& service) {
-    const auto verified = service.verifySignature(key, signed_data, signature);
+    const auto verified = service.verifySignature(key, signedData, signature);
     return verified ? status::kSuccess : verified.error().statusOr(status::kBadSignature);
 }
 

@@ -57,38 +57,38 @@ inline constexpr std::size_t kSatchelMaximumCertificateSize = 131072;
 /// buffer. All zero unless a decode succeeded.
 struct satchel_view {
     const std::byte* certificates = nullptr;  // the whole block, with its tag and length
-    std::uint64_t certificates_length = 0;    // A; may be zero after decoding
+    std::uint64_t certificatesLength = 0;     // A; may be zero after decoding
     const std::byte* payload = nullptr;
-    std::uint64_t payload_length = 0;  // B
+    std::uint64_t payloadLength = 0;  // B
     const std::byte* signature = nullptr;
-    std::uint64_t signature_length = 0;  // always 72
-    const std::byte* signed_data = nullptr;
-    std::uint64_t signed_data_length = 0;  // 16 + A + B
+    std::uint64_t signatureLength = 0;  // always 72
+    const std::byte* signedData = nullptr;
+    std::uint64_t signedDataLength = 0;  // 16 + A + B
     std::uint16_t version = 0;
 
     bool operator==(const satchel_view&) const = default;
 };
 
 /// The fields of a container's header, as stored.
-struct satchel_fields {
+struct SatchelFields {
     std::uint16_t version = 0;
     std::uint16_t reserved = 0;
-    std::uint32_t certificates_length = 0;
-    std::uint32_t payload_length = 0;
+    std::uint32_t certificatesLength = 0;
+    std::uint32_t payloadLength = 0;
 };
 
 /// The fields and parts of a container, valid or damaged, to show a damaged one.
-struct satchel_survey {
-    std::optional<satchel_fields> header;  // `nullopt` if it is shorter
+struct SatchelSurvey {
+    std::optional<SatchelFields> header;  // `nullopt` if it is shorter
 
     /// The best guess at the places of the parts. If the lengths do not add up, the certificate block's own
     /// DER length decides which of the two is wrong. A missing part is null.
     satchel_view view;
 
     /// `nullopt` if satchel_decode_header accepts the container.
-    std::optional<ticket_fault> fault;
+    std::optional<TicketFault> fault;
 };
-satchel_survey satchel_survey_container(base::ByteView container);
+SatchelSurvey surveySatchelContainer(base::ByteView container);
 
 /// Reads the framing alone: the certificate block, the payload and the signature are located, not read.
 std::int32_t satchel_decode_header(const std::byte* container, std::uint64_t length, satchel_view* view);
@@ -98,9 +98,9 @@ std::int32_t satchel_decode_header(const std::byte* container, std::uint64_t len
 std::int32_t satchel_verify_signature(const satchel_view* view, trust::TrustService& service);
 
 /// Decodes, verifies, and returns the payload as a part of the caller's container. After a failure `payload`
-/// is null and `payload_length` 0.
+/// is null and `payloadLength` 0.
 std::int32_t satchel_get_validated_payload(const std::byte* container, std::uint64_t length,
-                                           const std::byte** payload, std::uint64_t* payload_length,
+                                           const std::byte** payload, std::uint64_t* payloadLength,
                                            trust::TrustService& service);
 
 // The steps inside satchel_verify_signature, with a status for each kind of refusal. satchel_verify_signature
@@ -143,26 +143,25 @@ inline constexpr std::int64_t kTicketMinimumRSABits = 2048;
 inline constexpr std::int64_t kTicketMinimumEllipticCurveBits = 256;
 
 /// All of satchel_verify_signature, status and all.
-trust::Status _satchel_verify(const satchel_view* view, trust::TrustService& service);
+trust::Status verifySatchel(const satchel_view* view, trust::TrustService& service);
 
 /// The elements of the certificate block, as views of it, before the first that breaks a rule.
-struct satchel_certificate_block {
+struct SatchelCertificateBlock {
     std::array<base::ByteView, kSatchelMaximumCertificates> elements;
     std::size_t count = 0;
     trust::Status status = satchel_status::kSuccess;
-    std::optional<ticket_fault> fault;  // if the status is not success
+    std::optional<TicketFault> fault;  // if the status is not success
 
     void refuse(trust::Status why, std::uint64_t offset, const char* rule) {
         status = why;
-        fault = ticket_fault{offset, rule};
+        fault = TicketFault{offset, rule};
     }
 };
-satchel_certificate_block satchel_survey_certificates(base::ByteView block);
+SatchelCertificateBlock surveySatchelCertificates(base::ByteView block);
 
 /// The certificates of the block, signer first; empty unless it succeeds.
-trust::Status _satchel_copy_certificates(base::ByteView block,
-                                         std::vector<trust::CertificateRef>* certificates,
-                                         trust::TrustService& service);
+trust::Status readSatchelCertificates(base::ByteView block, std::vector<trust::CertificateRef>* certificates,
+                                      trust::TrustService& service);
 
 /// The platform security library's ticket-signing policy. Without it (no library, or the library does not
 /// know the name), a policy of the same content made here.
@@ -179,7 +178,7 @@ trust::Status _satchel_create_trust(const std::vector<trust::CertificateRef>& ce
                                     trust::TrustService& service);
 
 /// `signature` is the field of 72 bytes, padding included.
-trust::Status _satchel_validate_signature(const trust::PublicKey& key, base::ByteView signed_data,
+trust::Status _satchel_validate_signature(const trust::PublicKey& key, base::ByteView signedData,
                                           base::ByteView signature, trust::TrustService& service);
 
 /// Returns null unless both the identifier and the options are given. The name may be missing.

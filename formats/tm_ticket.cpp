@@ -94,15 +94,15 @@ Header blockHeader(const tm_ticket* ticket) {
     return readBlockHeader(reader);
 }
 
-std::optional<ticket_fault> findFault(ByteView payload, const Header& header, bool magic) {
-    if (payload.size() > kTicketMaximumSize) return ticket_fault{0, "the payload is longer than 16 MiB"};
-    if (!magic) return ticket_fault{0, "the payload does not begin with its magic, \"m8tk\""};
+std::optional<TicketFault> findFault(ByteView payload, const Header& header, bool magic) {
+    if (payload.size() > kTicketMaximumSize) return TicketFault{0, "the payload is longer than 16 MiB"};
+    if (!magic) return TicketFault{0, "the payload does not begin with its magic, \"m8tk\""};
     if (header.version != kVersionWithoutAlgorithms && header.version != kVersionWithAlgorithms)
-        return ticket_fault{4, "the payload's version is neither 1 nor 2"};
+        return TicketFault{4, "the payload's version is neither 1 nor 2"};
     if (std::ranges::find(kHashSizes, header.hashLength) == kHashSizes.end())
-        return ticket_fault{6, "the hash length is neither 20 nor 48"};
+        return TicketFault{6, "the hash length is neither 20 nor 48"};
     if (header.size() != payload.size())
-        return ticket_fault{8, "the number of entries does not fit the payload's length"};
+        return TicketFault{8, "the number of entries does not fit the payload's length"};
     return std::nullopt;
 }
 
@@ -142,8 +142,8 @@ std::int32_t copyEntry(ByteReader entry, std::uint16_t version, std::uint16_t ha
 }
 
 // A zeroed block that begins with the parts, one after the other; null if memory runs out.
-tm_ticket_ptr makeBlock(std::uint64_t size, std::initializer_list<ByteView> parts) {
-    tm_ticket_ptr ticket(new (std::nothrow) tm_ticket[static_cast<std::size_t>(size)]{});
+TicketPointer makeBlock(std::uint64_t size, std::initializer_list<ByteView> parts) {
+    TicketPointer ticket(new (std::nothrow) tm_ticket[static_cast<std::size_t>(size)]{});
     if (ticket == nullptr) return nullptr;
     auto end = std::as_writable_bytes(std::span(ticket.get(), static_cast<std::size_t>(size))).begin();
     for (const ByteView part : parts) end = std::ranges::copy(part, end).out;
@@ -168,7 +168,7 @@ std::int32_t tm_ticket_decode(const std::byte* payload, std::int64_t size, tm_ti
     if (payload == nullptr || ticket == nullptr) return kRefused;
 
     const ByteView bytes(payload, static_cast<std::size_t>(size));
-    const tm_ticket_survey survey = tm_ticket_survey_payload(bytes);
+    const TicketSurvey survey = surveyTicketPayload(bytes);
     if (survey.fault) return kRefused;
 
     ByteReader reader(bytes);
@@ -177,7 +177,7 @@ std::int32_t tm_ticket_decode(const std::byte* payload, std::int64_t size, tm_ti
     const ByteView flags = reader.bytes(4, "ticket flags");
     const ByteView signatureTime = reader.bytes(8, "ticket signature time");
     const ByteView entries = reader.bytes(reader.remaining(), "ticket entries");
-    tm_ticket_ptr made = makeBlock(bytes.size(), {versionToCount, signatureTime, flags, entries});
+    TicketPointer made = makeBlock(bytes.size(), {versionToCount, signatureTime, flags, entries});
     if (made == nullptr) return kRefused;
     *ticket = made.release();
     return kAccepted;
@@ -215,7 +215,7 @@ std::int32_t tm_ticket_copy_cdhash(const tm_ticket* ticket, std::uint64_t index,
     return copyEntry(entry, header.version, header.hashLength, cdhash);
 }
 
-bool tm_ticket_lists_cdhash(const tm_ticket* ticket, ByteView cdhash) {
+bool ticketListsHash(const tm_ticket* ticket, ByteView cdhash) {
     const std::uint32_t count = tm_ticket_get_cdhash_count(ticket);
     for (std::uint32_t index = 0; index < count; ++index) {
         tm_cdhash entry{};
@@ -225,12 +225,12 @@ bool tm_ticket_lists_cdhash(const tm_ticket* ticket, ByteView cdhash) {
     return false;
 }
 
-std::uint64_t tm_ticket_survey::entry_size() const {
-    return Header{.version = version, .hashLength = hash_length}.entrySize();
+std::uint64_t TicketSurvey::entrySize() const {
+    return Header{.version = version, .hashLength = hashLength}.entrySize();
 }
 
-tm_ticket_survey tm_ticket_survey_payload(ByteView payload) {
-    tm_ticket_survey survey;
+TicketSurvey surveyTicketPayload(ByteView payload) {
+    TicketSurvey survey;
     if (payload.size() < kTicketHeaderSize) {
         survey.fault = {payload.size(), "the payload ends inside its header"};
         return survey;
@@ -245,17 +245,16 @@ tm_ticket_survey tm_ticket_survey_payload(ByteView payload) {
 
     const Header layout = likeliestLayout(stored, survey.entries.size());
     survey.version = layout.version;
-    survey.hash_length = layout.hashLength;
+    survey.hashLength = layout.hashLength;
     survey.count = survey.entries.size() / layout.entrySize();
     return survey;
 }
 
-std::int32_t tm_ticket_survey_copy_cdhash(const tm_ticket_survey& survey, std::uint64_t index,
-                                          tm_cdhash* cdhash) {
+std::int32_t readSurveyedHash(const TicketSurvey& survey, std::uint64_t index, tm_cdhash* cdhash) {
     if (cdhash == nullptr || index >= survey.count) return kRefused;
-    const std::uint64_t size = survey.entry_size();
+    const std::uint64_t size = survey.entrySize();
     return copyEntry(ByteReader(survey.entries).sub(index * size, size, "entry"), survey.version,
-                     survey.hash_length, cdhash);
+                     survey.hashLength, cdhash);
 }
 
 std::size_t tm_cdhash_algorithm_get_size(std::uint32_t algorithm) {
@@ -270,9 +269,9 @@ std::uint64_t heldOfTicket(std::uint64_t length) {
     return std::min(length, kLongestTicketHeld);
 }
 
-std::optional<ticket_fault> faultOfTicketLength(std::uint64_t length, std::uint64_t offset) {
+std::optional<TicketFault> faultOfTicketLength(std::uint64_t length, std::uint64_t offset) {
     if (heldOfTicket(length) == length) return std::nullopt;
-    return ticket_fault{offset, "the ticket is too long to be read"};
+    return TicketFault{offset, "the ticket is too long to be read"};
 }
 
 }  // namespace pinwell

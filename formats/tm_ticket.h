@@ -63,36 +63,35 @@ std::int32_t satchel_get_validated_tm_ticket(const std::byte* container, std::ui
 std::int32_t tm_ticket_decode(const std::byte* payload, std::int64_t size, tm_ticket** ticket);
 
 /// The fields of a payload's header, as stored.
-struct tm_ticket_fields {
+struct TicketFields {
     std::uint16_t version = 0;
-    std::uint16_t hash_length = 0;
+    std::uint16_t hashLength = 0;
     std::uint32_t count = 0;
     std::uint32_t flags = 0;
-    std::uint64_t signature_time = 0;
+    std::uint64_t signatureTime = 0;
 };
 
 /// The fields of a payload, valid or damaged, to show a damaged one. The fields are as stored; `nullopt` if
 /// the payload is shorter than its header.
-struct tm_ticket_survey {
-    std::optional<tm_ticket_fields> header;  // `nullopt` if it is shorter
+struct TicketSurvey {
+    std::optional<TicketFields> header;  // `nullopt` if it is shorter
 
     /// How the entries are read: as the header says. If the header contradicts the payload's size, with the
     /// version and hash length that agree with most of the header.
     std::uint16_t version = 0;
-    std::uint16_t hash_length = 0;
+    std::uint16_t hashLength = 0;
     std::uint64_t count = 0;
     base::ByteView entries;  // part of the payload
 
     /// `nullopt` if tm_ticket_decode accepts the payload.
-    std::optional<ticket_fault> fault;
+    std::optional<TicketFault> fault;
 
-    std::uint64_t entry_size() const;
+    std::uint64_t entrySize() const;
 };
-tm_ticket_survey tm_ticket_survey_payload(base::ByteView payload);
+TicketSurvey surveyTicketPayload(base::ByteView payload);
 
 /// The entry at `index` of a survey, by the rules of tm_ticket_copy_cdhash.
-std::int32_t tm_ticket_survey_copy_cdhash(const tm_ticket_survey& survey, std::uint64_t index,
-                                          tm_cdhash* cdhash);
+std::int32_t readSurveyedHash(const TicketSurvey& survey, std::uint64_t index, tm_cdhash* cdhash);
 
 /// A ticket of the same bytes; null if memory runs out.
 tm_ticket* tm_ticket_copy(const tm_ticket* ticket);
@@ -111,17 +110,17 @@ std::int32_t tm_ticket_copy_cdhash(const tm_ticket* ticket, std::uint64_t index,
 
 /// Whether one of the entries is this hash. Compares as many bytes as the entry's algorithm has, and not the
 /// algorithm's number. Skips entries that cannot be copied.
-bool tm_ticket_lists_cdhash(const tm_ticket* ticket, base::ByteView cdhash);
+bool ticketListsHash(const tm_ticket* ticket, base::ByteView cdhash);
 
 /// Bytes of a code-directory hash by its algorithm, numbered as in code directories (codesign::DigestType):
 /// 20 for 0 to 3, 48 for 4; 0 if unknown.
 std::size_t tm_cdhash_algorithm_get_size(std::uint32_t algorithm);
 
 /// A ticket with an owner.
-struct tm_ticket_deleter {
+struct TicketDeleter {
     void operator()(tm_ticket* ticket) const noexcept { tm_ticket_free(ticket); }
 };
-using tm_ticket_ptr = std::unique_ptr<tm_ticket, tm_ticket_deleter>;
+using TicketPointer = std::unique_ptr<tm_ticket, TicketDeleter>;
 
 // How much of a stapled ticket is held in memory.
 
@@ -133,6 +132,6 @@ inline constexpr std::uint64_t kLongestTicketHeld = 64ULL * 1024 * 1024;
 std::uint64_t heldOfTicket(std::uint64_t length);
 
 /// The fault of a ticket of that length that begins at `offset` in its file; `nullopt` if it is held whole.
-std::optional<ticket_fault> faultOfTicketLength(std::uint64_t length, std::uint64_t offset);
+std::optional<TicketFault> faultOfTicketLength(std::uint64_t length, std::uint64_t offset);
 
 }  // namespace pinwell

@@ -49,7 +49,7 @@ void examine(ByteView input) {
 
     const auto service = serviceWithoutAnchors();
     std::vector<trust::CertificateRef> certificates;
-    if (_satchel_copy_certificates(input, &certificates, *service) != satchel_status::kSuccess) {
+    if (readSatchelCertificates(input, &certificates, *service) != satchel_status::kSuccess) {
         require(certificates.empty(), "a refusal hands out no certificate");
         return;
     }

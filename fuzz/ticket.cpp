@@ -45,11 +45,11 @@ void examinePayload(ByteView payload) {
         require(decoded == nullptr, "a refusal hands out no ticket");
         return;
     }
-    const tm_ticket_ptr ticket(decoded);
+    const TicketPointer ticket(decoded);
     require(std::ranges::equal(encodedHeader(decoded, payload), payload.first(kTicketHeaderSize)),
             "a ticket's fields are its payload's");
     examineEntries(decoded, payload);
-    const tm_ticket_ptr copy(tm_ticket_copy(decoded));
+    const TicketPointer copy(tm_ticket_copy(decoded));
     require(tm_ticket_get_cdhash_count(copy.get()) == tm_ticket_get_cdhash_count(decoded),
             "a copy is as long");
 }
@@ -57,13 +57,13 @@ void examinePayload(ByteView payload) {
 void examineView(const satchel_view& view, ByteView container) {
     base::ByteWriter writer;
     writer.text(kSatchelMagic).le16(view.version).bytes(container.subspan(6, 2));
-    writer.le32(static_cast<std::uint32_t>(view.certificates_length));
-    writer.le32(static_cast<std::uint32_t>(view.payload_length));
-    writer.bytes({view.certificates, view.certificates_length});
-    writer.bytes({view.payload, view.payload_length});
-    require(std::ranges::equal(writer.data(), ByteView(view.signed_data, view.signed_data_length)),
+    writer.le32(static_cast<std::uint32_t>(view.certificatesLength));
+    writer.le32(static_cast<std::uint32_t>(view.payloadLength));
+    writer.bytes({view.certificates, view.certificatesLength});
+    writer.bytes({view.payload, view.payloadLength});
+    require(std::ranges::equal(writer.data(), ByteView(view.signedData, view.signedDataLength)),
             "the signed bytes are the parts before the signature");
-    writer.bytes({view.signature, view.signature_length});
+    writer.bytes({view.signature, view.signatureLength});
     require(std::ranges::equal(writer.data(), container), "the parts make up the container");
 }
 
@@ -77,14 +77,14 @@ void examine(ByteView input) {
         return;
     }
     examineView(view, input);
-    examinePayload({view.payload, view.payload_length});
+    examinePayload({view.payload, view.payloadLength});
 
     test::FakeTrustService trust;
     const std::byte* payload = nullptr;
     std::uint64_t length = 0;
     const auto validated =
         satchel_get_validated_payload(input.data(), input.size(), &payload, &length, trust);
-    require((validated == 0) == (payload == view.payload && length == view.payload_length),
+    require((validated == 0) == (payload == view.payload && length == view.payloadLength),
             "what is validated is the payload, and else nothing is handed out");
     require(validated != 0 || !trust.signatureChecks.empty(), "nothing is validated without its signature");
     require(trust.parsedCertificates.size() <= kSatchelMaximumCertificates, "certificates are counted");

@@ -46,7 +46,7 @@ std::optional<Fault> faultOf(const std::optional<TicketPlaceFault>& fault) {
     return Fault{fault->rule, std::nullopt, fault->offset};
 }
 
-Trailer shown(const surveyed_trailer& trailer) {
+Trailer shown(const SurveyedTrailer& trailer) {
     Trailer made{.recordOffset = trailer.recordOffset,
                  .version = trailer.record.version(),
                  .type = trailer.record.type(),
@@ -57,8 +57,8 @@ Trailer shown(const surveyed_trailer& trailer) {
 }
 
 /// The trailers, past the first ticket and past damaged records.
-package_trailer_survey gatherTrailers(files::FileReader& file, TrailerPlace& into) {
-    const package_trailer_survey survey = surveyPackageTrailers(file, [&](const surveyed_trailer& trailer) {
+PackageTrailerSurvey gatherTrailers(files::FileReader& file, TrailerPlace& into) {
+    const PackageTrailerSurvey survey = surveyPackageTrailers(file, [&](const SurveyedTrailer& trailer) {
         ++into.trailerCount;
         if (into.trailers.size() < kMaximumTrailersKept) into.trailers.push_back(shown(trailer));
     });
@@ -175,7 +175,7 @@ std::optional<TicketPlaceFault> Inspector::gatherPackage(const URL& url, Report&
     const auto file = platform_.files.openForReading(url);
     if (file) {
         try {
-            const package_trailer_survey survey = gatherTrailers(**file, place);
+            const PackageTrailerSurvey survey = gatherTrailers(**file, place);
             fault = placeFault(survey.fault);
             if (survey.ticketStart && survey.ticketLength > 0) {
                 (*file)->seek(*survey.ticketStart);

@@ -32,7 +32,7 @@ class Offsets {
     }
 
     /// A fault of a part that begins at `base`.
-    std::optional<Fault> fault(const std::optional<ticket_fault>& found, std::uint64_t base) const {
+    std::optional<Fault> fault(const std::optional<TicketFault>& found, std::uint64_t base) const {
         if (!found) return std::nullopt;
         return fault(found->rule, base + found->offset);
     }
@@ -82,7 +82,7 @@ void gatherCertificates(ByteView block, Ticket& into) {
 
 std::optional<Fault> certificateFaultOf(ByteView block, std::uint64_t base, const Offsets& offsets,
                                         trust::TrustService& service) {
-    const auto fault = explainCertificates(block, satchel_survey_certificates(block), service);
+    const auto fault = explainCertificates(block, surveySatchelCertificates(block), service);
     return fault ? std::optional(offsets.fault(fault->reason, base + fault->offset)) : std::nullopt;
 }
 
@@ -111,32 +111,32 @@ void judgeChain(ByteView bytes, const satchel_view& view, trust::TrustService& s
         into.unreadable.empty() || into.certificates.front().range.offset < into.unreadable.front().offset;
     const trust::PublicKeyRef key = chain.evaluated->publicKey();
     if (key == nullptr || !signerIsReadable) return;
-    const auto status = _satchel_validate_signature(*key, ByteView(view.signed_data, view.signed_data_length),
-                                                    ByteView(view.signature, view.signature_length), service);
+    const auto status = _satchel_validate_signature(*key, ByteView(view.signedData, view.signedDataLength),
+                                                    ByteView(view.signature, view.signatureLength), service);
     into.signature = status == satchel_status::kSuccess ? Signature::verifies : Signature::fails;
 }
 
-Entry entryAt(const tm_ticket_survey& survey, std::uint64_t index, const std::optional<Hash>& artefact) {
+Entry entryAt(const TicketSurvey& survey, std::uint64_t index, const std::optional<Hash>& artefact) {
     Entry entry;
     entry.index = index;
     tm_cdhash record;
-    if (tm_ticket_survey_copy_cdhash(survey, index, &record) != 0) return entry;
+    if (readSurveyedHash(survey, index, &record) != 0) return entry;
     entry.isUsable = true;
     entry.hash = {record.algorithm, base::toData(ByteView(record.hash).first(record.length))};
     entry.matches = artefact && artefact->bytes == entry.hash.bytes;
     return entry;
 }
 
-Payload gatherPayload(const tm_ticket_survey& survey, Range range, const std::optional<Hash>& artefact) {
+Payload gatherPayload(const TicketSurvey& survey, Range range, const std::optional<Hash>& artefact) {
     Payload payload;
     payload.range = range;
     if (!survey.header) return payload;
     payload.hasHeader = true;
     payload.version = survey.header->version;
-    payload.hashLength = survey.header->hash_length;
+    payload.hashLength = survey.header->hashLength;
     payload.statedCount = survey.header->count;
     payload.flags = survey.header->flags;
-    payload.signatureTime = survey.header->signature_time;
+    payload.signatureTime = survey.header->signatureTime;
     payload.isRevoked = (payload.flags & kTicketRevoked) != 0;
     payload.entryCount = survey.count;
     for (std::uint64_t i = 0; i < survey.count; ++i) {
@@ -152,7 +152,7 @@ Payload gatherPayload(const tm_ticket_survey& survey, Range range, const std::op
 std::optional<Refusal> refusalOf(ByteView bytes, const std::optional<Holder>& holder, const Offsets& offsets,
                                  trust::TrustService& service) {
     const auto hash = holder && holder->hash ? std::optional(holder->hash->bytes) : std::nullopt;
-    const auto refusal = holder ? explain_ticket(bytes, hash, service) : explain_ticket(bytes, service);
+    const auto refusal = holder ? explainTicket(bytes, hash, service) : explainTicket(bytes, service);
     if (!refusal) return std::nullopt;
     return Refusal{refusal->step, offsets.fault(refusal->reason, refusal->offset)};
 }
@@ -171,26 +171,26 @@ Ticket gatherTicket(ByteView bytes, std::optional<std::uint64_t> fileOffset,
     ticket.fileOffset = fileOffset;
     ticket.refusal = refusalOf(bytes, holder, offsets, service);
 
-    const satchel_survey frame = satchel_survey_container(bytes);
+    const SatchelSurvey frame = surveySatchelContainer(bytes);
     ticket.frameFault = offsets.fault(frame.fault, 0);
     if (frame.header) {
         ticket.version = frame.header->version;
-        ticket.statedCertificatesLength = frame.header->certificates_length;
-        ticket.statedPayloadLength = frame.header->payload_length;
+        ticket.statedCertificatesLength = frame.header->certificatesLength;
+        ticket.statedPayloadLength = frame.header->payloadLength;
     }
-    if (frame.view.signed_data == nullptr) {
+    if (frame.view.signedData == nullptr) {
         ticket.chain.reason = "there is no certificate that can be read";
         return ticket;
     }
-    const ByteView block(frame.view.certificates, frame.view.certificates_length);
+    const ByteView block(frame.view.certificates, frame.view.certificatesLength);
     ticket.certificateBlock = rangeIn(bytes, block.data(), block.size());
-    ticket.signatureField = rangeIn(bytes, frame.view.signature, frame.view.signature_length);
+    ticket.signatureField = rangeIn(bytes, frame.view.signature, frame.view.signatureLength);
     gatherCertificates(block, ticket);
     ticket.certificateFault = certificateFaultOf(block, ticket.certificateBlock->offset, offsets, service);
     judgeChain(bytes, frame.view, service, ticket);
 
-    const ByteView payload(frame.view.payload, frame.view.payload_length);
-    const tm_ticket_survey survey = tm_ticket_survey_payload(payload);
+    const ByteView payload(frame.view.payload, frame.view.payloadLength);
+    const TicketSurvey survey = surveyTicketPayload(payload);
     ticket.payload = gatherPayload(survey, rangeIn(bytes, payload.data(), payload.size()),
                                    holder ? holder->hash : std::nullopt);
     ticket.payload->fault = offsets.fault(survey.fault, ticket.payload->range.offset);
@@ -203,9 +203,9 @@ bool looksLikeTicket(ByteView bytes) {
                std::ranges::equal(part.first(magic.size()), base::asBytes(magic));
     };
     if (beginsWith(bytes, kSatchelMagic)) return true;
-    const satchel_survey survey = satchel_survey_container(bytes);
+    const SatchelSurvey survey = surveySatchelContainer(bytes);
     return survey.view.payload != nullptr &&
-           beginsWith(ByteView(survey.view.payload, survey.view.payload_length), kTicketMagic);
+           beginsWith(ByteView(survey.view.payload, survey.view.payloadLength), kTicketMagic);
 }
 
 }  // namespace pinwell::inspect

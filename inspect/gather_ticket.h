@@ -12,7 +12,7 @@ struct Holder {
     std::optional<Hash> hash;  // `nullopt` without a valid signature
 };
 
-/// Shows the ticket, with the reason if explain_ticket refuses it. `holder` is `nullopt` for a ticket by
+/// Shows the ticket, with the reason if explainTicket refuses it. `holder` is `nullopt` for a ticket by
 /// itself, which is then judged without an artefact.
 Ticket gatherTicket(base::ByteView bytes, std::optional<std::uint64_t> fileOffset,
                     const std::optional<Holder>& holder, trust::TrustService& service);

@@ -27,7 +27,7 @@ using Opened = base::Result<std::unique_ptr<FileReader>>;
 /// The parsers' diagnostics, which name the file, are for the tool's verbose mode.
 constexpr const char* kNoName = "";
 
-Error malformed(const ticket_fault& fault, std::uint64_t base = 0) {
+Error malformed(const TicketFault& fault, std::uint64_t base = 0) {
     return {ErrorCode::malformed, base + fault.offset, 0, fault.rule};
 }
 
@@ -50,7 +50,7 @@ Slot slotOf(const BlobRecord& blob, std::uint64_t superblobOffset) {
 }
 
 Result<DiskImage> diskImageIn(FileReader& file) {
-    disk_image_signature read;
+    DiskImageSignature read;
     const bool isImage = readDiskImageTrailer(file, kNoName, read) &&
                          (!read.isSigned() ||
                           (readDiskImageSuperblob(file, kNoName, read) && readDiskImageBlobs(kNoName, read)));
@@ -75,7 +75,7 @@ Result<DiskImage> diskImageIn(FileReader& file) {
 
 Result<FlatPackage> flatPackageIn(FileReader& file) {
     FlatPackage package;
-    package_trailers read = walkPackageTrailers(file, kNoName, [&](const surveyed_trailer& trailer) {
+    PackageTrailers read = walkPackageTrailers(file, kNoName, [&](const SurveyedTrailer& trailer) {
         // Without data the walk ends with a fault, and this value is not returned.
         if (trailer.dataOffset)
             package.trailers.push_back({TrailerType{trailer.record.type()},
@@ -104,35 +104,35 @@ std::uint32_t version() noexcept {
 }
 
 Result<Container> decodeContainer(ByteView ticket) {
-    const satchel_survey frame = satchel_survey_container(ticket);
+    const SatchelSurvey frame = surveySatchelContainer(ticket);
     if (frame.fault) return malformed(*frame.fault);
 
-    const ByteView block(frame.view.certificates, frame.view.certificates_length);
-    const satchel_certificate_block certificates = satchel_survey_certificates(block);
+    const ByteView block(frame.view.certificates, frame.view.certificatesLength);
+    const SatchelCertificateBlock certificates = surveySatchelCertificates(block);
     if (certificates.fault) return malformed(*certificates.fault, offsetIn(ticket, block.data()));
 
     Container container;
     container.version = frame.header->version;
     container.reserved = frame.header->reserved;
-    container.signedBytes = ByteView(frame.view.signed_data, frame.view.signed_data_length);
+    container.signedBytes = ByteView(frame.view.signedData, frame.view.signedDataLength);
     const auto found = std::span(certificates.elements).first(certificates.count);
     container.certificates.assign(found.begin(), found.end());
-    container.payload = ByteView(frame.view.payload, frame.view.payload_length);
-    container.signature = ByteView(frame.view.signature, frame.view.signature_length);
+    container.payload = ByteView(frame.view.payload, frame.view.payloadLength);
+    container.signature = ByteView(frame.view.signature, frame.view.signatureLength);
     return container;
 }
 
 Result<Payload> decodePayload(ByteView payload) {
-    const tm_ticket_survey survey = tm_ticket_survey_payload(payload);
+    const TicketSurvey survey = surveyTicketPayload(payload);
     if (survey.fault) return malformed(*survey.fault);
-    return Payload{survey.header->version, survey.header->hash_length,    survey.header->count,
-                   survey.header->flags,   survey.header->signature_time, payload};
+    return Payload{survey.header->version, survey.header->hashLength,    survey.header->count,
+                   survey.header->flags,   survey.header->signatureTime, payload};
 }
 
 std::optional<Entry> entryAt(const Payload& payload, std::uint64_t index) {
-    const tm_ticket_survey survey = tm_ticket_survey_payload(payload.bytes);
+    const TicketSurvey survey = surveyTicketPayload(payload.bytes);
     tm_cdhash cdhash;
-    if (survey.fault || tm_ticket_survey_copy_cdhash(survey, index, &cdhash) != 0) return std::nullopt;
+    if (survey.fault || readSurveyedHash(survey, index, &cdhash) != 0) return std::nullopt;
     return Entry{cdhash.algorithm, base::toData(ByteView(cdhash.hash).first(cdhash.length))};
 }
 

@@ -102,13 +102,13 @@ Validation validate(ByteView ticket, const TrustedRoots& roots, std::int64_t eva
     if (satchel_get_validated_tm_ticket(ticket.data(), ticket.size(), &decoded, *service) != 0)
         return refused(explainRefusedTicket(ticket, *service));
 
-    const tm_ticket_ptr genuine(decoded);
+    const TicketPointer genuine(decoded);
     Validation validation;
     validation.isGenuine = true;
     validation.verdict = Verdict::unspecified;
     validation.isRevoked = (tm_ticket_get_flags(genuine.get()) & kTicketRevoked) != 0;
     validation.isListed = std::ranges::any_of(
-        cdhashes, [&](ByteView cdhash) { return tm_ticket_lists_cdhash(genuine.get(), cdhash); });
+        cdhashes, [&](ByteView cdhash) { return ticketListsHash(genuine.get(), cdhash); });
     return validation;
 }
 

@@ -240,7 +240,7 @@ void FetchedTicket::take(std::optional<base::Data> received, const std::vector<b
 std::string ruleBrokenByTicket(const std::optional<base::Data>& ticket, const std::vector<base::Data>& hashes,
                                trust::TrustService& trust) {
     if (!ticket) return "its text is not base64";
-    const auto refusal = explain_ticket(*ticket, hashes.front(), trust);
+    const auto refusal = explainTicket(*ticket, hashes.front(), trust);
     return refusal ? refusal->reason : "the ticket does not list every hash of the artefact";
 }
 

@@ -19,7 +19,7 @@ JudgedTicket::JudgedTicket(ByteView bytes, trust::TrustService& trust) {
         fault_ = explainRefusedTicket(bytes, trust).reason;
         return;
     }
-    const tm_ticket_ptr ticket(decoded);
+    const TicketPointer ticket(decoded);
     isGenuine_ = true;
     isRevoked_ = (tm_ticket_get_flags(ticket.get()) & pinwell::kTicketRevoked) != 0;
     signatureTime_ = tm_ticket_get_signature_time(ticket.get());

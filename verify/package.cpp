@@ -79,8 +79,8 @@ class TrailerCheck {
     std::uint64_t run() {
         SourceReader reader(source_);
         try {
-            const package_trailer_survey survey =
-                surveyPackageTrailers(reader, [&](const surveyed_trailer& trailer) { visit(trailer); });
+            const PackageTrailerSurvey survey =
+                surveyPackageTrailers(reader, [&](const SurveyedTrailer& trailer) { visit(trailer); });
             hasTerminator_ = survey.hasTerminator && !isBroken_;
         } catch (const files::FileHandleError&) {
             if (!isBroken_) fail(end_, kChain, "the trailers cannot be read");
@@ -93,14 +93,14 @@ class TrailerCheck {
   private:
     static constexpr const char* kChain = "a chain of trailers";
 
-    void visit(const surveyed_trailer& trailer) {
+    void visit(const SurveyedTrailer& trailer) {
         if (isBroken_) return;
         if (trailer_data_is_valid(trailer.record.bytes, nullptr)) check(trailer);
         if (trailer.fault) fail(trailer.fault->offset, kChain, trailer.fault->rule);
         isBroken_ = trailer.fault.has_value();
     }
 
-    void check(const surveyed_trailer& trailer) {
+    void check(const SurveyedTrailer& trailer) {
         constexpr std::size_t kUpperHalf = 12;
         const trailer_header& record = trailer.record;
         const ByteView unused = ByteView(record.bytes).subspan(kUpperHalf);

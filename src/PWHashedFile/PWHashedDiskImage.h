@@ -55,7 +55,7 @@ class PWHashedDiskImage : public PWHashedFile {
     bool writeSignature(base::SparseBuffer signatureAndTrailer, const URL& target, bool deleteExisting,
                         std::optional<Error>& held);
 
-    disk_image_signature signature_;  // for an unsigned image, an empty one
+    DiskImageSignature signature_;  // for an unsigned image, an empty one
     std::optional<Data> syntheticCDHash_;
     std::uint64_t endOfDMGData_ = 0;
 };

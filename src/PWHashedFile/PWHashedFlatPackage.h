@@ -50,7 +50,7 @@ class PWHashedFlatPackage : public PWHashedFile {
     std::optional<URL> saveMovedTrailers(files::FileHandle& file, base::SparseBuffer& tail) const;
     void writeTail(files::FileHandle& file, base::ByteView tail, const std::string& targetName);
 
-    package_trailers trailers_;  // without the ticket, which was moved out
+    PackageTrailers trailers_;  // without the ticket, which was moved out
 };
 
 }  // namespace pinwell

@@ -22,7 +22,7 @@ TEST(BoundedWork, TicketOfTheMostEntriesTakesOneBlockOfItsSize) {
     const AllocationCount count;
     tm_ticket* decoded = nullptr;
     ASSERT_EQ(tm_ticket_decode(payload.data(), static_cast<std::int64_t>(payload.size()), &decoded), 0);
-    const tm_ticket_ptr ticket(decoded);
+    const TicketPointer ticket(decoded);
     for (std::uint32_t i = 0; i < kEntries; ++i) {
         tm_cdhash hash;
         ASSERT_EQ(tm_ticket_copy_cdhash(decoded, i, &hash), 0);
@@ -59,7 +59,7 @@ TEST(BoundedWork, BlockOfAMillionCertificatesIsLeftAfterThree) {
     const Data block = derElement(0x30, elements);
     FakeTrustService service;
     std::vector<trust::CertificateRef> certificates;
-    EXPECT_EQ(_satchel_copy_certificates(block, &certificates, service), satchel_status::kBadCertificates);
+    EXPECT_EQ(readSatchelCertificates(block, &certificates, service), satchel_status::kBadCertificates);
     EXPECT_EQ(service.parsedCertificates.size(), 3U);
 }
 
@@ -70,7 +70,7 @@ TEST(BoundedWork, CertificateOfFourGibibytesIsNotLookedFor) {
             .build();
     FakeTrustService service;
     std::vector<trust::CertificateRef> certificates;
-    EXPECT_NE(_satchel_copy_certificates(block, &certificates, service), satchel_status::kSuccess);
+    EXPECT_NE(readSatchelCertificates(block, &certificates, service), satchel_status::kSuccess);
     EXPECT_TRUE(service.parsedCertificates.empty());
 }
 

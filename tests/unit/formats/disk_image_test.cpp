@@ -57,7 +57,7 @@ TEST(UDIFHeader, KeepsEveryByteExceptTheSignatureFields) {
 }
 
 struct Read {
-    disk_image_signature signature;
+    DiskImageSignature signature;
     std::vector<std::string> lines;
 };
 
@@ -96,7 +96,7 @@ TEST(DiskImageSignature, StatesItsFirstFaultWithTheOffset) {
     const DiskImageBuilder image = stapledImage().version(3);
     const std::uint64_t trailer = image.build().size() - 512;
     const auto [signature, lines] = readSigned(image);
-    EXPECT_EQ(signature.fault, (ticket_fault{trailer + 4, "the trailer's version is not 4"}));
+    EXPECT_EQ(signature.fault, (TicketFault{trailer + 4, "the trailer's version is not 4"}));
     EXPECT_EQ(explainTicketPlace(signature),
               (TicketPlaceFault{"the trailer's version is not 4", trailer + 4}));
     EXPECT_EQ(lines.size(), 1U);
@@ -106,13 +106,13 @@ TEST(DiskImageSignature, OfAnUnreadableTrailerSaysWhyAndThenFailsOnItsMagic) {
     const Data bytes = stapledImage().build();
     test::MemoryReader file(bytes, bytes.size() - 1);
     test::CollectedDiagnostics said;
-    disk_image_signature signature;
+    DiskImageSignature signature;
     EXPECT_FALSE(readDiskImageTrailer(file, "Sample.dmg", signature, said.diagnostics()));
     EXPECT_EQ(said.lines(),
               (std::vector<std::string>{
                   "Could read UDIF header of Sample.dmg. This should not have happened. a broken sector",
                   "Not a supported disk image format, 0"}));
-    EXPECT_STREQ(signature.fault.value_or(ticket_fault()).rule,
+    EXPECT_STREQ(signature.fault.value_or(TicketFault()).rule,
                  "the file does not end in a disk image's trailer");
 }
 

@@ -65,7 +65,7 @@ TEST(OutOfMemory, TicketTakesOneBlockOfItsPayloadsSize) {
         const MemoryShortage shortage(kPayloadSize + 1);
         EXPECT_EQ(tm_ticket_decode(payload.data(), kPayloadSize, &decoded), 0);
     }
-    const tm_ticket_ptr ticket(decoded);
+    const TicketPointer ticket(decoded);
     EXPECT_NE(ticket, nullptr);
 }
 
@@ -73,7 +73,7 @@ TEST(OutOfMemory, CopiesNoTicket) {
     const Data payload = largePayload();
     tm_ticket* decoded = nullptr;
     ASSERT_EQ(tm_ticket_decode(payload.data(), kPayloadSize, &decoded), 0);
-    const tm_ticket_ptr ticket(decoded);
+    const TicketPointer ticket(decoded);
     const tm_ticket* copy = ticket.get();
     {
         const MemoryShortage shortage(kPayloadSize);

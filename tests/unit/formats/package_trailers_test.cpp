@@ -165,19 +165,19 @@ TEST(PackageTrailer, ATicketOf4294967295BytesCanBeWrittenAndOneByteMoreCannot) {
 using test::PackageBuilder;
 
 struct Surveyed {
-    package_trailer_survey survey;
-    std::vector<surveyed_trailer> trailers;
+    PackageTrailerSurvey survey;
+    std::vector<SurveyedTrailer> trailers;
 };
 
 Surveyed surveyOf(const std::string& package) {
     test::MemoryReader file(base::toData(base::asBytes(package)));
     Surveyed found;
     found.survey = surveyPackageTrailers(
-        file, [&](const surveyed_trailer& trailer) { found.trailers.push_back(trailer); });
+        file, [&](const SurveyedTrailer& trailer) { found.trailers.push_back(trailer); });
     return found;
 }
 
-package_trailers walkOf(const std::string& package) {
+PackageTrailers walkOf(const std::string& package) {
     test::MemoryReader file(base::toData(base::asBytes(package)));
     return walkPackageTrailers(file, "Sample.pkg");
 }
@@ -245,23 +245,23 @@ TEST(PackageTrailerSurvey, EndsAtARecordWhoseDataWouldBeginBeforeTheFile) {
     const auto [survey, trailers] = surveyOf(package);
     ASSERT_EQ(trailers.size(), 1U);
     EXPECT_EQ(trailers[0].dataOffset, std::nullopt);
-    EXPECT_STREQ(survey.fault.value_or(ticket_fault()).rule, "a trailer's data would begin before the file");
+    EXPECT_STREQ(survey.fault.value_or(TicketFault()).rule, "a trailer's data would begin before the file");
     EXPECT_EQ(survey.fault, walkOf(package).fault);
 }
 
 TEST(PackageTrailerSurvey, ThrowsIfARecordCannotBeRead) {
     const std::string package = PackageBuilder().terminator().ticket("ticket").build();
     test::MemoryReader file(base::toData(base::asBytes(package)), package.size() - 1);
-    EXPECT_THROW(surveyPackageTrailers(file, [](const surveyed_trailer&) {}), files::FileHandleError);
+    EXPECT_THROW(surveyPackageTrailers(file, [](const SurveyedTrailer&) {}), files::FileHandleError);
 }
 
 TEST(PackageTrailerWalk, TurnsAReadErrorIntoAFaultAndADiagnosticLine) {
     const std::string package = PackageBuilder().terminator().ticket("ticket").build();
     test::MemoryReader file(base::toData(base::asBytes(package)), package.size() - 1);
     CollectedDiagnostics said;
-    const package_trailers walked = walkPackageTrailers(file, "Sample.pkg", {}, said.diagnostics());
+    const PackageTrailers walked = walkPackageTrailers(file, "Sample.pkg", {}, said.diagnostics());
     EXPECT_EQ(walked.ticket, std::nullopt);
-    EXPECT_EQ(walked.fault, (ticket_fault{package.size(), "the trailers cannot be read"}));
+    EXPECT_EQ(walked.fault, (TicketFault{package.size(), "the trailers cannot be read"}));
     EXPECT_EQ(said.text(), "Couldn't read existing package trailers of Sample.pkg. a broken sector.\n");
 }
 
@@ -269,7 +269,7 @@ TEST(PackageTrailerWalk, StatesEachStepInOrder) {
     test::MemoryReader file(
         base::toData(base::asBytes(PackageBuilder().terminator().ticket("ticket").build())));
     CollectedDiagnostics said;
-    const package_trailers walked = walkPackageTrailers(file, "Sample.pkg", {}, said.diagnostics());
+    const PackageTrailers walked = walkPackageTrailers(file, "Sample.pkg", {}, said.diagnostics());
     EXPECT_EQ(said.lines(),
               (std::vector<std::string>{
                   "Terminator Trailer size must be 0, not 6", "{magic: t8lr, version: 1, type: 2, length: 6}",

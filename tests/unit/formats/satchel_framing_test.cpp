@@ -37,13 +37,13 @@ TEST(SatchelFraming, LocatesEveryPart) {
     ASSERT_EQ(satchel_decode_header(container.data(), container.size(), &view), 0);
     const std::byte* start = container.data();
     EXPECT_EQ(view.certificates, start + 16);
-    EXPECT_EQ(view.certificates_length, kBlock);
+    EXPECT_EQ(view.certificatesLength, kBlock);
     EXPECT_EQ(view.payload, start + 16 + kBlock);
-    EXPECT_EQ(view.payload_length, 5U);
+    EXPECT_EQ(view.payloadLength, 5U);
     EXPECT_EQ(view.signature, start + 16 + kBlock + 5);
-    EXPECT_EQ(view.signature_length, 72U);
-    EXPECT_EQ(view.signed_data, start);
-    EXPECT_EQ(view.signed_data_length, 16 + kBlock + 5);
+    EXPECT_EQ(view.signatureLength, 72U);
+    EXPECT_EQ(view.signedData, start);
+    EXPECT_EQ(view.signedDataLength, 16 + kBlock + 5);
     EXPECT_EQ(view.version, 1);
 }
 
@@ -56,8 +56,8 @@ TEST(SatchelFraming, IsLittleEndianThroughout) {
     container.resize(16 + 0x102 + 3 + 72);
     satchel_view view;
     ASSERT_EQ(satchel_decode_header(container.data(), container.size(), &view), 0);
-    EXPECT_EQ(view.certificates_length, 0x102U);
-    EXPECT_EQ(view.payload_length, 3U);
+    EXPECT_EQ(view.certificatesLength, 0x102U);
+    EXPECT_EQ(view.payloadLength, 3U);
 }
 
 TEST(SatchelFraming, RefusesAMagicThatDiffersInAnyByte) {
@@ -84,7 +84,7 @@ TEST(SatchelFraming, DecodesWithoutACertificateBlock) {
     const Data container = SatchelBuilder().certificateBlock({}).payload(toData("hello")).build();
     satchel_view view;
     ASSERT_EQ(satchel_decode_header(container.data(), container.size(), &view), 0);
-    EXPECT_EQ(view.certificates_length, 0U);
+    EXPECT_EQ(view.certificatesLength, 0U);
     EXPECT_EQ(view.payload, container.data() + 16);
 }
 

@@ -48,17 +48,17 @@ class SatchelTrust : public testing::Test {
         }
         satchel_view view;
         EXPECT_EQ(satchel_decode_header(container.data(), container.size(), &view), 0);
-        return _satchel_verify(&view, *service_);
+        return verifySatchel(&view, *service_);
     }
     trust::Status verify(const SatchelBuilder& builder) { return verify(builder.build()); }
 
     // Null when it is refused. Once verify() has made the service.
-    tm_ticket_ptr validatedTicket(ByteView container) {
+    TicketPointer validatedTicket(ByteView container) {
         tm_ticket* ticket = nullptr;
         const std::int32_t result =
             satchel_get_validated_tm_ticket(container.data(), container.size(), &ticket, *service_);
         EXPECT_EQ(result, ticket != nullptr ? 0 : -1);
-        return tm_ticket_ptr(ticket);
+        return TicketPointer(ticket);
     }
 
     Date now = kNow;
@@ -74,7 +74,7 @@ TEST_F(SatchelTrust, AcceptsAChainOfThePlatformsOwnRootAndHandsOutItsTicket) {
     trustAsPlatformRoot(chain);
     const Data container = SatchelBuilder::of(chain, payload).build();
     ASSERT_EQ(verify(container), status::kSuccess);
-    const tm_ticket_ptr ticket = validatedTicket(container);
+    const TicketPointer ticket = validatedTicket(container);
     ASSERT_NE(ticket, nullptr);
     EXPECT_EQ(tm_ticket_get_cdhash_count(ticket.get()), 1U);
 }

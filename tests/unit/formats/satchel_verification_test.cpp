@@ -54,7 +54,7 @@ class SatchelVerification : public testing::Test {
         satchel_view view;
         EXPECT_EQ(satchel_decode_header(container.data(), container.size(), &view), 0);
         FakeTrustService untouched = service;
-        const trust::Status result = _satchel_verify(&view, service);
+        const trust::Status result = verifySatchel(&view, service);
         EXPECT_EQ(satchel_verify_signature(&view, untouched), result == status::kSuccess ? 0 : -1);
         return result;
     }
@@ -96,18 +96,18 @@ TEST_F(SatchelVerification, RefusesAViewWithAPartMissingWithoutACall) {
     satchel_view whole;
     ASSERT_EQ(satchel_decode_header(container.data(), container.size(), &whole), 0);
     std::vector<satchel_view> views(6, whole);
-    views[0].signed_data = nullptr;
-    views[1].signed_data_length = 0;
+    views[0].signedData = nullptr;
+    views[1].signedDataLength = 0;
     views[2].signature = nullptr;
-    views[3].signature_length = 0;
+    views[3].signatureLength = 0;
     views[4].certificates = nullptr;
-    views[5].certificates_length = 0;
+    views[5].certificatesLength = 0;
     for (const satchel_view& view : views) {
-        EXPECT_EQ(_satchel_verify(&view, service), status::kNotAvailable);
+        EXPECT_EQ(verifySatchel(&view, service), status::kNotAvailable);
         EXPECT_EQ(satchel_verify_signature(&view, service), -1);
     }
     const satchel_view empty;
-    EXPECT_EQ(_satchel_verify(&empty, service), status::kNotAvailable);
+    EXPECT_EQ(verifySatchel(&empty, service), status::kNotAvailable);
     EXPECT_THAT(service.parsedCertificates, IsEmpty());
 }
 
@@ -287,7 +287,7 @@ TEST_F(SatchelVerification, DoesNotMakeSuccessOfACodeThatIsTooLargeForAStatus) {
 // Places for results, and memory.
 
 TEST_F(SatchelVerification, NeedsAPlaceForEveryResult) {
-    EXPECT_EQ(_satchel_copy_certificates(derElement(0x30, kLeaf), nullptr, service), status::kBadParameter);
+    EXPECT_EQ(readSatchelCertificates(derElement(0x30, kLeaf), nullptr, service), status::kBadParameter);
     EXPECT_EQ(_satchel_create_trust({}, nullptr, nullptr, service), status::kBadParameter);
     EXPECT_EQ(_satchel_create_cert_policy(nullptr, service), status::kBadParameter);
 }
@@ -300,7 +300,7 @@ TEST_F(SatchelVerification, HandsOutNothingThatItRefuses) {
 
     std::vector<trust::CertificateRef> certificates(1);
     const Data twoAndAHalf = derElement(0x30, bytes({0x30, 0x00, 0x30, 0x00, 0x30}));
-    EXPECT_EQ(_satchel_copy_certificates(twoAndAHalf, &certificates, service), status::kNotAvailable);
+    EXPECT_EQ(readSatchelCertificates(twoAndAHalf, &certificates, service), status::kNotAvailable);
     EXPECT_THAT(certificates, IsEmpty());
 }
 
@@ -314,7 +314,7 @@ TEST_F(SatchelVerification, RefusesWhenMemoryRunsOut) {
     const Data container = satchel().build();
     satchel_view view;
     ASSERT_EQ(satchel_decode_header(container.data(), container.size(), &view), 0);
-    EXPECT_EQ(_satchel_verify(&view, exhausted), status::kNotAvailable);
+    EXPECT_EQ(verifySatchel(&view, exhausted), status::kNotAvailable);
     EXPECT_EQ(satchel_verify_signature(&view, exhausted), -1);
 }
 
@@ -377,7 +377,7 @@ class ValidatedTicket : public testing::Test {
     }
 
     FakeTrustService service;
-    tm_ticket_ptr ticket;
+    TicketPointer ticket;
 };
 
 TEST_F(ValidatedTicket, IsDecodedFromTheValidatedPayload) {

@@ -17,12 +17,12 @@ using base::Data;
 using test::hashOf;
 using test::TicketPayloadBuilder;
 
-tm_ticket_ptr decode(const Data& payload) {
+TicketPointer decode(const Data& payload) {
     tm_ticket* ticket = nullptr;
     const std::int32_t result =
         tm_ticket_decode(payload.data(), static_cast<std::int64_t>(payload.size()), &ticket);
     EXPECT_EQ(result, ticket != nullptr ? 0 : -1);
-    return tm_ticket_ptr(ticket);
+    return TicketPointer(ticket);
 }
 
 bool accepts(const TicketPayloadBuilder& payload) {
@@ -30,7 +30,7 @@ bool accepts(const TicketPayloadBuilder& payload) {
 }
 
 // Only the hash, without the record's padding.
-Data hashAt(const tm_ticket_ptr& ticket, std::uint64_t index) {
+Data hashAt(const TicketPointer& ticket, std::uint64_t index) {
     tm_cdhash record;
     if (tm_ticket_copy_cdhash(ticket.get(), index, &record) != 0) return {};
     const auto hash = std::span(record.hash).first(record.length);
@@ -46,7 +46,7 @@ TicketPayloadBuilder zeroEntries(std::uint16_t version, std::uint16_t hashLength
 }
 
 TEST(TicketPayload, ReadsEveryFieldOfAVersion2Ticket) {
-    const tm_ticket_ptr ticket = decode(TicketPayloadBuilder()
+    const TicketPointer ticket = decode(TicketPayloadBuilder()
                                             .version(2)
                                             .flags(0x80000001)
                                             .signatureTime(0x8877665544332211)
@@ -67,7 +67,7 @@ TEST(TicketPayload, ReadsEveryFieldOfAVersion2Ticket) {
 }
 
 TEST(TicketPayload, ReadsEveryFieldOfAVersion1Ticket) {
-    const tm_ticket_ptr ticket =
+    const TicketPointer ticket =
         decode(TicketPayloadBuilder().version(1).revoked().entry(0, hashOf(10)).entry(0, hashOf(50)).build());
     ASSERT_NE(ticket, nullptr);
     EXPECT_EQ(tm_ticket_get_version(ticket.get()), 1);
@@ -91,7 +91,7 @@ TEST(TicketPayload, IsLittleEndianThroughout) {
                                          0x02, 1,    2,    3,    4,    5,    6,    7,    8,  9, 10,
                                          11,   12,   13,   14,   15,   16,   17,   18,   19, 20};
     const auto bytes = std::as_bytes(std::span(kPayload));
-    const tm_ticket_ptr ticket = decode({bytes.begin(), bytes.end()});
+    const TicketPointer ticket = decode({bytes.begin(), bytes.end()});
     ASSERT_NE(ticket, nullptr);
     EXPECT_EQ(tm_ticket_get_flags(ticket.get()), 0x01020304U);
     EXPECT_EQ(tm_ticket_get_signature_time(ticket.get()), 0x0102030405060708U);
@@ -101,7 +101,7 @@ TEST(TicketPayload, IsLittleEndianThroughout) {
 TEST(TicketPayload, OfTheHeaderAloneIsATicketWithoutEntries) {
     const Data payload = TicketPayloadBuilder().count(0).build();
     ASSERT_EQ(payload.size(), 24U);
-    const tm_ticket_ptr ticket = decode(payload);
+    const TicketPointer ticket = decode(payload);
     ASSERT_NE(ticket, nullptr);
     EXPECT_EQ(tm_ticket_get_cdhash_count(ticket.get()), 0U);
     tm_cdhash record;
@@ -174,7 +174,7 @@ TEST(TicketPayload, RefusesACountThatTheSizeDoesNotBearOut) {
 TEST(TicketPayload, AcceptsTheLargestTicketOf16MiBOrLess) {
     const Data payload = zeroEntries(1, 20, 838859).build();
     ASSERT_EQ(payload.size(), 16777204U);
-    const tm_ticket_ptr ticket = decode(payload);
+    const TicketPointer ticket = decode(payload);
     ASSERT_NE(ticket, nullptr);
     EXPECT_EQ(hashAt(ticket, 838858), Data(20));
 }
@@ -222,7 +222,7 @@ TEST(TicketPayload, RefusesAMissingPayloadOrPlaceForTheTicket) {
 }
 
 TEST(TicketPayload, WritesTheTicketOnlyOnSuccess) {
-    const tm_ticket_ptr before = decode(TicketPayloadBuilder().build());
+    const TicketPointer before = decode(TicketPayloadBuilder().build());
     tm_ticket* ticket = before.get();
     const Data payload = TicketPayloadBuilder().version(3).build();
     EXPECT_EQ(tm_ticket_decode(payload.data(), static_cast<std::int64_t>(payload.size()), &ticket), -1);
@@ -230,7 +230,7 @@ TEST(TicketPayload, WritesTheTicketOnlyOnSuccess) {
 }
 
 TEST(Ticket, DoesNotNeedThePayloadItWasDecodedFrom) {
-    tm_ticket_ptr ticket;
+    TicketPointer ticket;
     {
         Data payload = TicketPayloadBuilder().entry(2, hashOf(7)).build();
         ticket = decode(payload);
@@ -243,7 +243,7 @@ TEST(Ticket, DoesNotNeedThePayloadItWasDecodedFrom) {
 class TicketOfUnusableEntries : public testing::TestWithParam<std::uint8_t> {};
 
 TEST_P(TicketOfUnusableEntries, DecodesAndKeepsTheOthersUsable) {
-    const tm_ticket_ptr ticket = decode(TicketPayloadBuilder()
+    const TicketPointer ticket = decode(TicketPayloadBuilder()
                                             .version(2)
                                             .entry(1, hashOf(10))
                                             .entry(GetParam(), hashOf(20))
@@ -259,7 +259,7 @@ TEST_P(TicketOfUnusableEntries, DecodesAndKeepsTheOthersUsable) {
 INSTANTIATE_TEST_SUITE_P(Algorithm, TicketOfUnusableEntries, testing::Values(0, 4, 5, 0x80, 0xFF));
 
 TEST(TicketEntry, OfAlgorithm4Has48Bytes) {
-    const tm_ticket_ptr ticket =
+    const TicketPointer ticket =
         decode(TicketPayloadBuilder().hashLength(48).entry(4, hashOf(1, 48)).build());
     ASSERT_NE(ticket, nullptr);
     tm_cdhash record;
@@ -270,7 +270,7 @@ TEST(TicketEntry, OfAlgorithm4Has48Bytes) {
 }
 
 TEST(TicketEntry, OfAlgorithm1InATicketOfHashLength48IsTheFirst20Bytes) {
-    const tm_ticket_ptr ticket = decode(
+    const TicketPointer ticket = decode(
         TicketPayloadBuilder().hashLength(48).entry(1, hashOf(1, 48)).entry(4, hashOf(100, 48)).build());
     ASSERT_NE(ticket, nullptr);
     EXPECT_EQ(hashAt(ticket, 0), hashOf(1, 20));
@@ -278,7 +278,7 @@ TEST(TicketEntry, OfAlgorithm1InATicketOfHashLength48IsTheFirst20Bytes) {
 }
 
 TEST(TicketEntry, OfAVersion1TicketHas20BytesWhateverTheHashLength) {
-    const tm_ticket_ptr ticket = decode(TicketPayloadBuilder()
+    const TicketPointer ticket = decode(TicketPayloadBuilder()
                                             .version(1)
                                             .hashLength(48)
                                             .entry(0, hashOf(1, 48))
@@ -290,7 +290,7 @@ TEST(TicketEntry, OfAVersion1TicketHas20BytesWhateverTheHashLength) {
 }
 
 TEST(TicketEntry, LeavesZerosAfterTheHash) {
-    const tm_ticket_ptr ticket = decode(TicketPayloadBuilder().entry(2, Data(20, std::byte{0xEE})).build());
+    const TicketPointer ticket = decode(TicketPayloadBuilder().entry(2, Data(20, std::byte{0xEE})).build());
     ASSERT_NE(ticket, nullptr);
     tm_cdhash record;
     record.hash.fill(std::byte{0xAA});
@@ -301,7 +301,7 @@ TEST(TicketEntry, LeavesZerosAfterTheHash) {
 }
 
 TEST(TicketEntry, IsRefusedAtOrAfterTheCount) {
-    const tm_ticket_ptr ticket =
+    const TicketPointer ticket =
         decode(TicketPayloadBuilder().entry(2, hashOf(1)).entry(2, hashOf(2)).build());
     ASSERT_NE(ticket, nullptr);
     tm_cdhash record;
@@ -314,13 +314,13 @@ TEST(TicketEntry, IsRefusedAtOrAfterTheCount) {
 }
 
 TEST(TicketEntry, IsRefusedWithoutAPlaceForIt) {
-    const tm_ticket_ptr ticket = decode(TicketPayloadBuilder().entry(2, hashOf(1)).build());
+    const TicketPointer ticket = decode(TicketPayloadBuilder().entry(2, hashOf(1)).build());
     ASSERT_NE(ticket, nullptr);
     EXPECT_EQ(tm_ticket_copy_cdhash(ticket.get(), 0, nullptr), -1);
 }
 
 TEST(TicketEntry, LeavesTheRecordAloneWhenItIsRefused) {
-    const tm_ticket_ptr ticket = decode(TicketPayloadBuilder().entry(5, hashOf(1)).build());
+    const TicketPointer ticket = decode(TicketPayloadBuilder().entry(5, hashOf(1)).build());
     ASSERT_NE(ticket, nullptr);
     tm_cdhash record;
     record.algorithm = 77;
@@ -334,7 +334,7 @@ TEST(TicketEntry, LeavesTheRecordAloneWhenItIsRefused) {
 }
 
 TEST(TicketCopy, HoldsTheSameAndOutlivesTheOriginal) {
-    tm_ticket_ptr original = decode(TicketPayloadBuilder()
+    TicketPointer original = decode(TicketPayloadBuilder()
                                         .hashLength(48)
                                         .revoked()
                                         .signatureTime(1234567890123)
@@ -342,11 +342,11 @@ TEST(TicketCopy, HoldsTheSameAndOutlivesTheOriginal) {
                                         .entry(2, hashOf(2, 48))
                                         .build());
     ASSERT_NE(original, nullptr);
-    const tm_ticket_ptr copy(tm_ticket_copy(original.get()));
+    const TicketPointer copy(tm_ticket_copy(original.get()));
     ASSERT_NE(copy, nullptr);
     ASSERT_NE(copy, original);
     original.reset();
-    const tm_ticket_ptr second(tm_ticket_copy(copy.get()));
+    const TicketPointer second(tm_ticket_copy(copy.get()));
     ASSERT_NE(second, nullptr);
     EXPECT_EQ(tm_ticket_get_version(second.get()), 2);
     EXPECT_EQ(tm_ticket_get_flags(second.get()), kTicketRevoked);
@@ -357,8 +357,8 @@ TEST(TicketCopy, HoldsTheSameAndOutlivesTheOriginal) {
 }
 
 TEST(TicketCopy, OfATicketWithoutEntries) {
-    const tm_ticket_ptr original = decode(TicketPayloadBuilder().build());
-    const tm_ticket_ptr copy(tm_ticket_copy(original.get()));
+    const TicketPointer original = decode(TicketPayloadBuilder().build());
+    const TicketPointer copy(tm_ticket_copy(original.get()));
     ASSERT_NE(copy, nullptr);
     EXPECT_EQ(tm_ticket_get_cdhash_count(copy.get()), 0U);
 }

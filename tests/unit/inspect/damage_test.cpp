@@ -29,7 +29,7 @@ class DamagedTicket : public InspectTest {
         tm_ticket* ticket = nullptr;
         const bool accepted = satchel_get_validated_tm_ticket(container.data(), container.size(), &ticket,
                                                               services().trust) == 0;
-        const tm_ticket_ptr owner(ticket);
+        const TicketPointer owner(ticket);
         return accepted;
     }
     Data flipped(std::size_t at, std::byte bits) const {

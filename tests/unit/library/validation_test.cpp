@@ -169,7 +169,7 @@ TEST_F(Judging, AgreesWithTheToolWhicheverByteIsWrong) {
         tm_ticket* decoded = nullptr;
         const bool isAccepted =
             satchel_get_validated_tm_ticket(damaged.data(), damaged.size(), &decoded, *service) == 0;
-        const tm_ticket_ptr owner(decoded);
+        const TicketPointer owner(decoded);
         const Validation validation = judge(damaged);
         EXPECT_EQ(validation.isGenuine, isAccepted) << "byte " << i;
         EXPECT_EQ(validation.reason.empty(), isAccepted) << "byte " << i;
