@@ -3,7 +3,7 @@
 #include "lumora-local/certificates.h"
 #include "lumora-local/endpoint.h"
 #include "lumora-local/key_file.h"
-#include "lumora-local/openssl_handles.h"
+#include "lumora-local/openssl.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -89,7 +89,7 @@ Identity issueSigner(const IssuerFiles& intermediate, Date now, std::string_view
 
 std::string certifySigner(const IssuerFiles& intermediate, base::ByteView publicKey, Date now) {
     const IssuedCertificate issuer = readIssuer(intermediate);
-    const unsigned char* der = octets(publicKey);
+    const unsigned char* der = unsignedBytes(publicKey);
     const KeyHandle key(d2i_PUBKEY(nullptr, &der, static_cast<long>(publicKey.size())));
     require(key != nullptr, "read a public key");
     return encodeCertificate(certifyKey(signerProfile(), key.get(), issuer, now).get());

@@ -11,6 +11,9 @@
 namespace pinwell::lumora {
 namespace {
 
+using crypto::ExtensionHandle;
+using crypto::NumberHandle;
+using crypto::OctetStringHandle;
 using values::Date;
 
 constexpr std::int64_t kDay = 24 * 60 * 60;
@@ -28,7 +31,6 @@ void releaseExtensions(STACK_OF(X509_EXTENSION) * list) {
 
 using RequestHandle = base::Handle<X509_REQ, X509_REQ_free>;
 using ExtensionListHandle = base::Handle<STACK_OF(X509_EXTENSION), releaseExtensions>;
-using OctetStringHandle = base::Handle<ASN1_OCTET_STRING, ASN1_OCTET_STRING_free>;
 
 void setSerialNumber(X509* certificate) {
     const NumberHandle number(BN_new());
@@ -42,7 +44,7 @@ void setSerialNumber(X509* certificate) {
 void addNames(X509_NAME* subject, const std::string& commonName) {
     const auto add = [&](const char* field, std::string_view text) {
         const base::ByteView bytes = base::asBytes(text);
-        require(X509_NAME_add_entry_by_txt(subject, field, MBSTRING_UTF8, octets(bytes),
+        require(X509_NAME_add_entry_by_txt(subject, field, MBSTRING_UTF8, unsignedBytes(bytes),
                                            static_cast<int>(bytes.size()), -1, 0) == 1,
                 "set a subject");
     };

@@ -77,7 +77,6 @@ namespace {
 constexpr std::size_t kMaximumKeyFile = std::size_t{64} * 1024;
 
 using PrivateKeyInfoHandle = base::Handle<PKCS8_PRIV_KEY_INFO, PKCS8_PRIV_KEY_INFO_free>;
-using AlgorithmHandle = base::Handle<X509_ALGOR, X509_ALGOR_free>;
 using EncryptedKeyHandle = base::Handle<X509_SIG, X509_SIG_free>;
 
 // RFC 7914: 16 MiB for each guess, the library's default maximum.
@@ -143,8 +142,8 @@ std::string encodeKey(EVP_PKEY* key, std::string_view passphrase) {
                 "encode a key");
     } else {
         const PrivateKeyInfoHandle plain(EVP_PKEY2PKCS8(key));
-        AlgorithmHandle algorithm(PKCS5_pbe2_set_scrypt(EVP_aes_256_cbc(), nullptr, kSaltSize, nullptr,
-                                                        kScryptCost, kScryptBlocks, kScryptLanes));
+        crypto::AlgorithmHandle algorithm(PKCS5_pbe2_set_scrypt(
+            EVP_aes_256_cbc(), nullptr, kSaltSize, nullptr, kScryptCost, kScryptBlocks, kScryptLanes));
         require(plain != nullptr && algorithm != nullptr, "encrypt a key");
         const EncryptedKeyHandle encrypted(PKCS8_set0_pbe(
             passphrase.data(), static_cast<int>(passphrase.size()), plain.get(), algorithm.get()));

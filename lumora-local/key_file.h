@@ -10,7 +10,7 @@
 #include <string>
 #include <string_view>
 
-#include "lumora-local/openssl_handles.h"
+#include "lumora-local/openssl.h"
 
 namespace pinwell::lumora {
 

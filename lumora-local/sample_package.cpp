@@ -41,14 +41,6 @@ constexpr std::string_view kPackageInfo =
     "          install-location=\"/\" auth=\"none\"/>\n";
 constexpr std::string_view kReadMe = "A sample package, to try a record service with.\n";
 
-using MessageHandle = base::Handle<CMS_ContentInfo, CMS_ContentInfo_free>;
-
-// The stack owns its certificates too.
-struct FreeStack {
-    void operator()(STACK_OF(X509) * stack) const noexcept { sk_X509_pop_free(stack, X509_free); }
-};
-using CertificateStack = std::unique_ptr<STACK_OF(X509), FreeStack>;
-
 /// A file in the heap after checksum and signature, according to the table.
 struct ArchivedFile {
     std::string_view name;
@@ -84,22 +76,22 @@ class Signer {
     /// SignedData (RFC 5652) in DER, detached; its length does not depend on the content.
     Data sign(const Data& content) const {
         const BioHandle input(BIO_new_mem_buf(content.data(), static_cast<int>(content.size())));
-        const CertificateStack others(sk_X509_new_null());
+        const crypto::CertificateListHandle others(sk_X509_new_null());
         require(input != nullptr && others != nullptr && X509_up_ref(root_.certificate.get()) == 1 &&
                     sk_X509_push(others.get(), root_.certificate.get()) > 0,
                 "prepare a signature");
-        const MessageHandle message(CMS_sign(leaf_.certificate.get(), leaf_.key.get(), others.get(),
-                                             input.get(), CMS_BINARY | CMS_DETACHED | CMS_NOSMIMECAP));
+        const crypto::MessageHandle message(CMS_sign(leaf_.certificate.get(), leaf_.key.get(), others.get(),
+                                                     input.get(),
+                                                     CMS_BINARY | CMS_DETACHED | CMS_NOSMIMECAP));
         require(message != nullptr, "sign a package");
-        return encodeDer<const CMS_ContentInfo>(i2d_CMS_ContentInfo, message.get(), "encode a signature");
+        return encodeDer<CMS_ContentInfo>(i2d_CMS_ContentInfo, message.get(), "encode a signature");
     }
 
     /// KeyInfo of XML signatures, with the chain in base64 of DER, leaf first.
     std::string keyInfo() const {
         std::string certificates;
         for (const IssuedCertificate* issued : {&leaf_, &root_}) {
-            const Data encoded =
-                encodeDer<const X509>(i2d_X509, issued->certificate.get(), "encode a certificate");
+            const Data encoded = encodeDer<X509>(i2d_X509, issued->certificate.get(), "encode a certificate");
             certificates += format("<X509Certificate>%@</X509Certificate>", base::encodeBase64(encoded));
         }
         return format(

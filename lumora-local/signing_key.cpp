@@ -19,7 +19,7 @@
 #include "base/handle.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/key_file.h"
-#include "lumora-local/openssl_handles.h"
+#include "lumora-local/openssl.h"
 #include "lumora-local/service_settings.h"
 #include "lumora-local/sha256.h"
 #include "values/format.h"
@@ -200,16 +200,16 @@ class KeyFromFile final : public SigningKey {
     explicit KeyFromFile(KeyHandle key) : key_(std::move(key)) {}
 
     Data publicKey() const override {
-        return encodeDer<const EVP_PKEY>(i2d_PUBKEY, key_.get(), "encode a public key");
+        return encodeDer<EVP_PKEY>(i2d_PUBKEY, key_.get(), "encode a public key");
     }
 
     Data sign(ByteView message) const override {
-        const DigestContextHandle context(EVP_MD_CTX_new());
+        const crypto::DigestContextHandle context(EVP_MD_CTX_new());
         Data signature(kMaximumSignature);
         std::size_t length = signature.size();
         require(context != nullptr &&
                     EVP_DigestSignInit(context.get(), nullptr, EVP_sha256(), nullptr, key_.get()) == 1 &&
-                    EVP_DigestSign(context.get(), octets(signature), &length, octets(message),
+                    EVP_DigestSign(context.get(), unsignedBytes(signature), &length, unsignedBytes(message),
                                    message.size()) == 1,
                 "sign a ticket");
         signature.resize(length);

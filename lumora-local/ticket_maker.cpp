@@ -6,7 +6,7 @@
 
 #include "base/byte_io.h"
 #include "lumora-local/certificates.h"
-#include "lumora-local/openssl_handles.h"
+#include "lumora-local/openssl.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -37,7 +37,7 @@ void requireEncodable(const CodeHash& hash, bool withAlgorithm) {
 }
 
 void appendDer(Data& data, X509* certificate) {
-    base::append(data, encodeDer<const X509>(i2d_X509, certificate, "encode a certificate"));
+    base::append(data, encodeDer<X509>(i2d_X509, certificate, "encode a certificate"));
 }
 
 Data derSequence(const Data& contents) {
@@ -45,7 +45,7 @@ Data derSequence(const Data& contents) {
     const int total = ASN1_object_size(1, length, V_ASN1_SEQUENCE);
     require(total > length, "encode the certificate block");
     Data sequence(static_cast<std::size_t>(total - length));
-    unsigned char* end = octets(sequence);
+    unsigned char* end = unsignedBytes(sequence);
     ASN1_put_object(&end, 1, length, V_ASN1_SEQUENCE, V_ASN1_UNIVERSAL);
     base::append(sequence, contents);
     return sequence;
@@ -53,7 +53,7 @@ Data derSequence(const Data& contents) {
 
 /// Whether the certificate is for the key with this SubjectPublicKeyInfo.
 bool isFor(X509* certificate, ByteView publicKey) {
-    const unsigned char* der = octets(publicKey);
+    const unsigned char* der = unsignedBytes(publicKey);
     const KeyHandle key(d2i_PUBKEY(nullptr, &der, static_cast<long>(publicKey.size())));
     EVP_PKEY* certified = X509_get0_pubkey(certificate);
     const bool same = key != nullptr && certified != nullptr && EVP_PKEY_eq(key.get(), certified) == 1;

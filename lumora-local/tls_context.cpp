@@ -14,7 +14,7 @@
 #include "lumora-local/certificates.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/key_file.h"
-#include "lumora-local/openssl_handles.h"
+#include "lumora-local/openssl.h"
 #include "trust/der.h"
 #include "values/format.h"
 
@@ -61,12 +61,8 @@ bool hasKeyWithinBounds(X509* certificate) {
 }
 
 bool isWithinBounds(X509* certificate) {
-    unsigned char* bytes = nullptr;
-    const int length = i2d_X509(certificate, &bytes);
-    if (length <= 0) return false;
-    const std::unique_ptr<unsigned char, OpenSSLFree> owner(bytes);
-    const auto der = std::as_bytes(std::span(bytes, static_cast<std::size_t>(length)));
-    return der.size() <= kMaximumCertificateSize && trust::der::isNestedDefinite(der) &&
+    const base::Data der = crypto::encodedBy<X509>(i2d_X509, certificate);
+    return !der.empty() && der.size() <= kMaximumCertificateSize && trust::der::isNestedDefinite(der) &&
            hasKeyWithinBounds(certificate);
 }
 

@@ -10,7 +10,7 @@
 #include <vector>
 
 #include "lumora-local/key_file.h"
-#include "lumora-local/openssl_handles.h"
+#include "lumora-local/openssl.h"
 #include "lumora-local/signing_key.h"
 
 namespace pinwell::lumora {
@@ -21,10 +21,6 @@ using base::Data;
 using values::format;
 
 using UriHandle = base::Handle<P11KitUri, p11_kit_uri_free>;
-using SignatureHandle = base::Handle<ECDSA_SIG, ECDSA_SIG_free>;
-using ParameterBuilder = base::Handle<OSSL_PARAM_BLD, OSSL_PARAM_BLD_free>;
-using Parameters = base::Handle<OSSL_PARAM, OSSL_PARAM_free>;
-using KeyContext = base::Handle<EVP_PKEY_CTX, EVP_PKEY_CTX_free>;
 
 constexpr std::size_t kCoordinate = 32;              // bytes of a number on P-256
 constexpr std::size_t kPoint = 1 + 2 * kCoordinate;  // an uncompressed point: 4, x, y
@@ -123,20 +119,20 @@ Data publicKeyOf(const std::string& uri, Data point) {
     if (point.size() == kPoint + 2 && point[0] == std::byte{V_ASN1_OCTET_STRING}) {
         point.erase(point.begin(), point.begin() + 2);
     }
-    const ParameterBuilder builder(OSSL_PARAM_BLD_new());
+    const crypto::ParameterBuilderHandle builder(OSSL_PARAM_BLD_new());
     require(builder != nullptr && point.size() == kPoint &&
                 OSSL_PARAM_BLD_push_utf8_string(builder.get(), OSSL_PKEY_PARAM_GROUP_NAME, "P-256", 0) == 1 &&
                 OSSL_PARAM_BLD_push_octet_string(builder.get(), OSSL_PKEY_PARAM_PUB_KEY, point.data(),
                                                  point.size()) == 1,
             "use the public key of " + uri);
-    const Parameters parameters(OSSL_PARAM_BLD_to_param(builder.get()));
-    const KeyContext context(EVP_PKEY_CTX_new_from_name(nullptr, "EC", nullptr));
+    const crypto::ParametersHandle parameters(OSSL_PARAM_BLD_to_param(builder.get()));
+    const crypto::KeyContextHandle context(EVP_PKEY_CTX_new_from_name(nullptr, "EC", nullptr));
     EVP_PKEY* made = nullptr;
     require(parameters != nullptr && context != nullptr && EVP_PKEY_fromdata_init(context.get()) == 1 &&
                 EVP_PKEY_fromdata(context.get(), &made, EVP_PKEY_PUBLIC_KEY, parameters.get()) == 1,
             "use the public key in the token");
     const KeyHandle key(made);
-    return encodeDer<const EVP_PKEY>(i2d_PUBKEY, key.get(), "encode a public key");
+    return encodeDer<EVP_PKEY>(i2d_PUBKEY, key.get(), "encode a public key");
 }
 
 /// An open session with the token, and the place of the key in it.
@@ -232,21 +228,21 @@ class TokenKey final : public DigestSigner {
         if (result == CKR_OK && session_->asksEachTime) result = session_->sayPin(CKU_CONTEXT_SPECIFIC);
         if (result == CKR_OK) {
             // The interface takes bytes that it does not change.
-            auto* bytes = const_cast<unsigned char*>(octets(digest));
+            auto* bytes = const_cast<unsigned char*>(unsignedBytes(digest));
             result = calls.C_Sign(session_->session, bytes, digest.size(), numbers.data(), &length);
         }
         if (result != CKR_OK || length != numbers.size()) {
             throw Failure(EX_IOERR, format("%@: cannot sign: %s", session_->name, p11_kit_strerror(result)));
         }
-        SignatureHandle signature(ECDSA_SIG_new());
-        NumberHandle r(BN_bin2bn(numbers.data(), kCoordinate, nullptr));
-        NumberHandle s(BN_bin2bn(numbers.data() + kCoordinate, kCoordinate, nullptr));
+        crypto::EcdsaSignatureHandle signature(ECDSA_SIG_new());
+        crypto::NumberHandle r(BN_bin2bn(numbers.data(), kCoordinate, nullptr));
+        crypto::NumberHandle s(BN_bin2bn(numbers.data() + kCoordinate, kCoordinate, nullptr));
         require(signature != nullptr && r != nullptr && s != nullptr &&
                     ECDSA_SIG_set0(signature.get(), r.get(), s.get()) == 1,
                 "encode a signature");
         static_cast<void>(r.release());  // the signature has them
         static_cast<void>(s.release());
-        return encodeDer<const ECDSA_SIG>(i2d_ECDSA_SIG, signature.get(), "encode a signature");
+        return encodeDer<ECDSA_SIG>(i2d_ECDSA_SIG, signature.get(), "encode a signature");
     }
 
   private:

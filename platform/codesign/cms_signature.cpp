@@ -22,13 +22,11 @@ using base::Data;
 using ber::Reader;
 using ber::Work;
 using crypto::ErrorQueueGuard;
+using crypto::NameHandle;
 using crypto::unsignedBytes;
 using values::Date;
 
 namespace {
-
-using Key = base::Handle<EVP_PKEY, EVP_PKEY_free>;
-using DigestContext = base::Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
 
 constexpr const char* kPublicKey = "the signer's key";
 constexpr const char* kPssParameters = "the signature's algorithm";
@@ -211,12 +209,12 @@ void requireSignature(ByteView publicKey, const Algorithm& digestAlgorithm,
     if (digest == nullptr) refuse("the signer's digest algorithm is unknown");
 
     const unsigned char* cursor = unsignedBytes(publicKey);
-    const Key key(d2i_PUBKEY(nullptr, &cursor, static_cast<long>(publicKey.size())));
+    const crypto::KeyHandle key(d2i_PUBKEY(nullptr, &cursor, static_cast<long>(publicKey.size())));
     if (!key) refuse("the signer's key is malformed");
     if (signature.size() > static_cast<std::size_t>(std::max(EVP_PKEY_get_size(key.get()), 0)))
         refuse("the signer's signature does not verify");
 
-    const DigestContext context(EVP_MD_CTX_new());
+    const crypto::DigestContextHandle context(EVP_MD_CTX_new());
     EVP_PKEY_CTX* keyContext = nullptr;
     if (!context || EVP_DigestVerifyInit(context.get(), &keyContext, digest, nullptr, key.get()) != 1)
         refuse("the signer's key cannot verify a signature");
@@ -225,8 +223,6 @@ void requireSignature(ByteView publicKey, const Algorithm& digestAlgorithm,
                          bytes.size()) != 1)
         refuse("the signer's signature does not verify");
 }
-
-using Name = base::Handle<X509_NAME, X509_NAME_free>;
 
 constexpr const char* kSignedAttributes = "the signed attributes";
 constexpr const char* kUnsignedAttributes = "the unsigned attributes";
@@ -243,17 +239,17 @@ constexpr std::string_view kTimeStampTokenAttribute =
 /// bytes.
 constexpr std::size_t kMaximumNameSize = 4096;
 
-Name parseName(ByteView bytes) {
+NameHandle parseName(ByteView bytes) {
     const unsigned char* cursor = unsignedBytes(bytes);
-    return Name(d2i_X509_NAME(nullptr, &cursor, static_cast<long>(bytes.size())));
+    return NameHandle(d2i_X509_NAME(nullptr, &cursor, static_cast<long>(bytes.size())));
 }
 
 // A name may have other string types in the message than in the certificate.
 bool isSameName(ByteView a, ByteView b) {
     if (ber::isEqual(a, b)) return true;
     if (a.size() > kMaximumNameSize || b.size() > kMaximumNameSize) return false;
-    const Name first = parseName(a);
-    const Name second = parseName(b);
+    const NameHandle first = parseName(a);
+    const NameHandle second = parseName(b);
     return first && second && X509_NAME_cmp(first.get(), second.get()) == 0;
 }
 

@@ -13,15 +13,12 @@
 namespace pinwell::https {
 namespace {
 
-using BioHandle = base::Handle<BIO, BIO_free>;
-using CertificateHandle = base::Handle<X509, X509_free>;
-using ContextHandle = base::Handle<SSL_CTX, SSL_CTX_free>;
-using KeyHandle = base::Handle<EVP_PKEY, EVP_PKEY_free>;
+using crypto::BioHandle;
+using crypto::CertificateHandle;
+using crypto::CertificateListHandle;
+using crypto::KeyHandle;
 
-struct FreeList {
-    void operator()(STACK_OF(X509) * list) const noexcept { sk_X509_pop_free(list, X509_free); }
-};
-using ListHandle = std::unique_ptr<STACK_OF(X509), FreeList>;
+using ContextHandle = base::Handle<SSL_CTX, SSL_CTX_free>;
 
 Error wrongFile(std::string text) {
     return {base::kDataErrorDomain, base::kMalformedDocument, std::move(text)};
@@ -49,7 +46,7 @@ Result<KeyHandle> readKey(const std::string& path) {
 
 struct Certificates {
     CertificateHandle own;
-    ListHandle issuers;
+    CertificateListHandle issuers;
 };
 
 // One file may hold the key as well: all of it is wiped, like what OpenSSL makes of it.
@@ -58,7 +55,7 @@ Result<Certificates> readCertificates(const std::string& path) {
     const auto length = base::readSecretFile(path, room->bytes());
     if (!length) return length.error();
     const BioHandle pem(BIO_new_mem_buf(room->bytes().data(), static_cast<int>(*length)));
-    Certificates certificates{nullptr, ListHandle(sk_X509_new_null())};
+    Certificates certificates{nullptr, CertificateListHandle(sk_X509_new_null())};
     std::size_t count = 0;
     while (CertificateHandle certificate{PEM_read_bio_X509(pem.get(), nullptr, nullptr, nullptr)}) {
         if (++count > kMaximumPeerCertificates)

@@ -15,6 +15,7 @@
 #include <utility>
 
 #include "base/handle.h"
+#include "crypto/openssl.h"
 #include "https/transfer_error.h"
 
 namespace pinwell::https {
@@ -34,19 +35,6 @@ bool namesUser(std::string_view text) {
     return text.substr(0, text.find_first_of("/?#")).find('@') != std::string_view::npos;
 }
 
-struct OpenSSLFree {
-    void operator()(unsigned char* bytes) const noexcept { OPENSSL_free(bytes); }
-};
-
-std::optional<Data> derOf(const X509* certificate) {
-    unsigned char* bytes = nullptr;
-    const int length = i2d_X509(certificate, &bytes);
-    if (length <= 0) return std::nullopt;
-    const std::unique_ptr<unsigned char, OpenSSLFree> owner(bytes);
-    const auto view = std::as_bytes(std::span(bytes, static_cast<std::size_t>(length)));
-    return Data(view.begin(), view.end());
-}
-
 // The server's certificates, the leaf first. `nullopt` if there are none, too many, or one that cannot be
 // encoded.
 std::optional<std::vector<Data>> peerCertificates(const X509_STORE_CTX* context) {
@@ -57,9 +45,8 @@ std::optional<std::vector<Data>> peerCertificates(const X509_STORE_CTX* context)
 
     std::vector<Data> list;
     const auto add = [&list](const X509* certificate) {
-        auto der = derOf(certificate);
-        if (der) list.push_back(std::move(*der));
-        return der.has_value();
+        list.push_back(crypto::encodedBy<X509>(i2d_X509, certificate));
+        return !list.back().empty();
     };
     if (!add(leaf)) return std::nullopt;
     for (int i = 0; i < count; ++i) {

@@ -10,11 +10,9 @@
 namespace pinwell::trust {
 namespace {
 
-using crypto::Handle;
-
-using BioHandle = Handle<BIO, BIO_free_all>;
-using NameHandle = Handle<X509_NAME, X509_NAME_free>;
-using ObjectHandle = Handle<ASN1_OBJECT, ASN1_OBJECT_free>;
+using crypto::BioHandle;
+using crypto::NameHandle;
+using crypto::ObjectHandle;
 
 /// The text of a name that `readName` accepts, so its parts are well-formed and bounded in number.
 std::string nameText(const der::Element& encoded) {
@@ -24,9 +22,7 @@ std::string nameText(const der::Element& encoded) {
     // UTF-8 stays readable; terminal control characters are escaped.
     const unsigned long flags = (XN_FLAG_RFC2253 & ~ASN1_STRFLGS_ESC_MSB) | ASN1_STRFLGS_ESC_CTRL;
     if (!name || !text || X509_NAME_print_ex(text.get(), name.get(), 0, flags) < 0) return {};
-    char* bytes = nullptr;
-    const long length = BIO_get_mem_data(text.get(), &bytes);
-    return length > 0 ? std::string(bytes, static_cast<std::size_t>(length)) : std::string();
+    return crypto::textOf(text.get());
 }
 
 /// The magnitude of a number in two's complement.

@@ -14,11 +14,11 @@ namespace pinwell::trust {
 
 namespace {
 
+using crypto::DigestContextHandle;
 using crypto::ErrorQueueGuard;
-using crypto::Handle;
+using crypto::NumberHandle;
+using crypto::ParameterBuilderHandle;
 using crypto::unsignedBytes;
-
-using DigestContext = Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
 
 constexpr std::uint8_t kSignBit = 0x80;
 constexpr std::size_t kLongestInteger = 67;  // the order of P-521 has 66 bytes, a positive integer one more
@@ -59,7 +59,7 @@ bool verifyEcdsa(const X509PublicKey& key, ByteView message, ByteView field) {
     const ByteView signature = signatureElement(field);
     if (signature.empty()) return false;
     const ErrorQueueGuard guard;
-    const DigestContext context(EVP_MD_CTX_new());
+    const DigestContextHandle context(EVP_MD_CTX_new());
     return context &&
            EVP_DigestVerifyInit(context.get(), nullptr, EVP_sha256(), nullptr, key.native()) == 1 &&
            EVP_DigestVerify(context.get(), unsignedBytes(signature), signature.size(), unsignedBytes(message),
@@ -68,10 +68,6 @@ bool verifyEcdsa(const X509PublicKey& key, ByteView message, ByteView field) {
 
 namespace {
 
-using BignumHandle = Handle<BIGNUM, BN_free>;
-using BuilderHandle = Handle<OSSL_PARAM_BLD, OSSL_PARAM_BLD_free>;
-using ContextHandle = Handle<EVP_PKEY_CTX, EVP_PKEY_CTX_free>;
-using ParametersHandle = Handle<OSSL_PARAM, OSSL_PARAM_free>;
 using Kind = SubjectKey::Kind;
 using Scheme = SignatureAlgorithm::Scheme;
 using SharedKey = std::shared_ptr<EVP_PKEY>;
@@ -83,13 +79,13 @@ SharedKey own(EVP_PKEY* key) {
     return key == nullptr ? nullptr : SharedKey(key, EVP_PKEY_free);
 }
 
-BignumHandle number(ByteView bytes) {
-    return BignumHandle(BN_bin2bn(unsignedBytes(bytes), static_cast<int>(bytes.size()), nullptr));
+NumberHandle number(ByteView bytes) {
+    return NumberHandle(BN_bin2bn(unsignedBytes(bytes), static_cast<int>(bytes.size()), nullptr));
 }
 
 SharedKey fromParameters(const char* type, OSSL_PARAM_BLD* builder) {
-    const ParametersHandle parameters(OSSL_PARAM_BLD_to_param(builder));
-    const ContextHandle context(EVP_PKEY_CTX_new_from_name(nullptr, type, nullptr));
+    const crypto::ParametersHandle parameters(OSSL_PARAM_BLD_to_param(builder));
+    const crypto::KeyContextHandle context(EVP_PKEY_CTX_new_from_name(nullptr, type, nullptr));
     EVP_PKEY* key = nullptr;
     if (!parameters || !context || EVP_PKEY_fromdata_init(context.get()) != 1 ||
         EVP_PKEY_fromdata(context.get(), &key, EVP_PKEY_PUBLIC_KEY, parameters.get()) != 1) {
@@ -99,9 +95,9 @@ SharedKey fromParameters(const char* type, OSSL_PARAM_BLD* builder) {
 }
 
 SharedKey makeRsa(const SubjectKey& key) {
-    const BignumHandle modulus = number(key.modulus);
-    const BignumHandle exponent = number(key.exponent);
-    const BuilderHandle builder(OSSL_PARAM_BLD_new());
+    const NumberHandle modulus = number(key.modulus);
+    const NumberHandle exponent = number(key.exponent);
+    const ParameterBuilderHandle builder(OSSL_PARAM_BLD_new());
     if (!modulus || !exponent || !builder ||
         OSSL_PARAM_BLD_push_BN(builder.get(), OSSL_PKEY_PARAM_RSA_N, modulus.get()) != 1 ||
         OSSL_PARAM_BLD_push_BN(builder.get(), OSSL_PKEY_PARAM_RSA_E, exponent.get()) != 1) {
@@ -112,7 +108,7 @@ SharedKey makeRsa(const SubjectKey& key) {
 
 /// OpenSSL refuses a point that is not on the curve, also a compressed one without a valid y.
 SharedKey makeEllipticCurve(const SubjectKey& key) {
-    const BuilderHandle builder(OSSL_PARAM_BLD_new());
+    const ParameterBuilderHandle builder(OSSL_PARAM_BLD_new());
     const std::string curve(key.curve);
     if (!builder ||
         OSSL_PARAM_BLD_push_utf8_string(builder.get(), OSSL_PKEY_PARAM_GROUP_NAME, curve.c_str(), 0) != 1 ||
@@ -225,7 +221,7 @@ bool X509PublicKey::verifies(const SignatureAlgorithm& algorithm, ByteView messa
                              ByteView signature) const {
     if (!isFor(algorithm) || !hasProperLength(algorithm, signature)) return false;
     const ErrorQueueGuard guard;
-    const DigestContext context(EVP_MD_CTX_new());
+    const DigestContextHandle context(EVP_MD_CTX_new());
     const std::string digest(algorithm.digest.name);
     EVP_PKEY_CTX* choices = nullptr;  // belongs to the context
     if (!context ||

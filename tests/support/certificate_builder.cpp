@@ -16,8 +16,7 @@
 #include <mutex>
 
 #include "base/byte_io.h"
-#include "base/handle.h"
-#include "support/openssl_handles.h"
+#include "crypto/openssl.h"
 #include "support/require.h"
 #include "support/ticket_builder.h"
 #include "trust/der.h"
@@ -29,44 +28,23 @@ using base::ByteView;
 using base::ByteWriter;
 using base::Data;
 
-using base::Handle;
+using crypto::BioHandle;
+using crypto::CertificateHandle;
+using crypto::DigestContextHandle;
+using crypto::EcdsaSignatureHandle;
+using crypto::ExtensionHandle;
+using crypto::NameHandle;
+using crypto::NumberHandle;
+using crypto::ObjectHandle;
+using crypto::textOf;
+using crypto::unsignedBytes;
 
-using EcdsaHandle = Handle<ECDSA_SIG, ECDSA_SIG_free>;
-using NumberHandle = Handle<BIGNUM, BN_free>;
-using DigestHandle = Handle<EVP_MD_CTX, EVP_MD_CTX_free>;
-using KeyContextHandle = Handle<EVP_PKEY_CTX, EVP_PKEY_CTX_free>;
-using NameHandle = Handle<X509_NAME, X509_NAME_free>;
-using OctetsHandle = Handle<ASN1_OCTET_STRING, ASN1_OCTET_STRING_free>;
-
-const unsigned char* unsignedBytes(const std::byte* bytes) {
-    return static_cast<const unsigned char*>(static_cast<const void*>(bytes));
-}
-unsigned char* unsignedBytes(std::byte* bytes) {
-    return static_cast<unsigned char*>(static_cast<void*>(bytes));
-}
 const unsigned char* unsignedText(const std::string& text) {
     return static_cast<const unsigned char*>(static_cast<const void*>(text.data()));
 }
 
-/// Runs one of OpenSSL's i2d functions twice: for the size, then for the bytes.
-template <class Object, class Encode>
-Data encoded(Object* object, Encode encode) {
-    const int size = encode(object, nullptr);
-    require(size > 0, "encoding failed");
-    Data der(static_cast<std::size_t>(size));
-    unsigned char* out = unsignedBytes(der.data());
-    encode(object, &out);
-    return der;
-}
-
-std::string contents(BIO* bio) {
-    char* text = nullptr;
-    const long size = BIO_get_mem_data(bio, &text);
-    return {text, static_cast<std::size_t>(size)};
-}
-
 EVP_PKEY* generateOnDescribedCurve(const char* curve) {
-    const KeyContextHandle context(EVP_PKEY_CTX_new_from_name(nullptr, "EC", nullptr));
+    const crypto::KeyContextHandle context(EVP_PKEY_CTX_new_from_name(nullptr, "EC", nullptr));
     require(context && EVP_PKEY_keygen_init(context.get()) == 1 &&
                 EVP_PKEY_CTX_set_group_name(context.get(), curve) == 1 &&
                 EVP_PKEY_CTX_set_ec_param_enc(context.get(), OPENSSL_EC_EXPLICIT_CURVE) == 1,
@@ -113,8 +91,8 @@ NameHandle makeName(const DistinguishedName& name) {
 void addExtension(X509* certificate, const ExtensionField& field) {
     const ObjectHandle oid(OBJ_txt2obj(field.oid.c_str(), 1));
     require(oid != nullptr, "bad extension OID");
-    const OctetsHandle value(ASN1_OCTET_STRING_new());
-    require(ASN1_OCTET_STRING_set(value.get(), unsignedBytes(field.value.data()),
+    const crypto::OctetStringHandle value(ASN1_OCTET_STRING_new());
+    require(ASN1_OCTET_STRING_set(value.get(), unsignedBytes(field.value),
                                   static_cast<int>(field.value.size())) == 1,
             "bad extension value");
     const ExtensionHandle extension(
@@ -161,7 +139,7 @@ std::optional<Data> resolve(const KeyIdentifier& identifier, const std::optional
 Data publicKeyDigest(X509* certificate) {
     Data digest(SHA_DIGEST_LENGTH);
     unsigned size = 0;
-    require(X509_pubkey_digest(certificate, EVP_sha1(), unsignedBytes(digest.data()), &size) == 1, "digest");
+    require(X509_pubkey_digest(certificate, EVP_sha1(), unsignedBytes(digest), &size) == 1, "digest");
     return digest;
 }
 
@@ -195,11 +173,11 @@ void addExtensions(X509* certificate, const CertificateFields& fields, const std
 }
 
 /// A context that signs according to the fields. `choices` belongs to it.
-DigestHandle signingContext(const SigningKey& signer, const CertificateFields& fields) {
+DigestContextHandle signingContext(const SigningKey& signer, const CertificateFields& fields) {
     const bool choosesDigest = EVP_PKEY_is_a(signer.native(), "ED25519") != 1;
     const EVP_MD* const digest =
         fields.pss ? messageDigest(fields.pss->digest) : messageDigest(fields.digest);
-    DigestHandle context(EVP_MD_CTX_new());
+    DigestContextHandle context(EVP_MD_CTX_new());
     EVP_PKEY_CTX* choices = nullptr;
     require(context && EVP_DigestSignInit(context.get(), &choices, choosesDigest ? digest : nullptr, nullptr,
                                           signer.native()) == 1,
@@ -239,14 +217,14 @@ Data edited(const Data& der, const CertificateFields& fields, const SigningKey& 
         endToEnd({all.version, all.serialNumber, all.innerAlgorithm, all.issuer, all.validity, all.subject,
                   all.key, all.issuerUniqueIdentifier, all.subjectUniqueIdentifier, all.extensions}));
     if (!all.signature) {
-        const DigestHandle context = signingContext(signer, fields);
+        const DigestContextHandle context = signingContext(signer, fields);
         std::size_t size = 0;
-        require(EVP_DigestSign(context.get(), nullptr, &size, unsignedBytes(body.data()), body.size()) == 1,
+        require(EVP_DigestSign(context.get(), nullptr, &size, unsignedBytes(body), body.size()) == 1,
                 "signing");
         Data bits(size);
-        require(EVP_DigestSign(context.get(), unsignedBytes(bits.data()), &size, unsignedBytes(body.data()),
-                               body.size()) == 1,
-                "signing");
+        require(
+            EVP_DigestSign(context.get(), unsignedBytes(bits), &size, unsignedBytes(body), body.size()) == 1,
+            "signing");
         bits.resize(size);
         all.signature = derElement(0x03, ByteWriter().u8(0).bytes(bits).data());
     }
@@ -306,22 +284,22 @@ SigningKey SigningKey::cached(KeyKind kind, const std::string& name) {
 std::string SigningKey::pem() const {
     const BioHandle bio(BIO_new(BIO_s_mem()));
     require(PEM_write_bio_PrivateKey(bio.get(), native(), nullptr, nullptr, 0, nullptr, nullptr) == 1, "PEM");
-    return contents(bio.get());
+    return textOf(bio.get());
 }
 
 Data SigningKey::publicKeyInfo() const {
-    return encoded(native(), i2d_PUBKEY);
+    return crypto::encodedBy<EVP_PKEY>(i2d_PUBKEY, native());
 }
 
 Data SigningKey::sign(ByteView message) const {
-    const DigestHandle context(EVP_MD_CTX_new());
+    const DigestContextHandle context(EVP_MD_CTX_new());
     require(EVP_DigestSignInit(context.get(), nullptr, EVP_sha256(), nullptr, native()) == 1, "sign");
     std::size_t size = 0;
-    require(EVP_DigestSign(context.get(), nullptr, &size, unsignedBytes(message.data()), message.size()) == 1,
+    require(EVP_DigestSign(context.get(), nullptr, &size, unsignedBytes(message), message.size()) == 1,
             "sign");
     Data signature(size);
-    require(EVP_DigestSign(context.get(), unsignedBytes(signature.data()), &size,
-                           unsignedBytes(message.data()), message.size()) == 1,
+    require(EVP_DigestSign(context.get(), unsignedBytes(signature), &size, unsignedBytes(message),
+                           message.size()) == 1,
             "sign");
     signature.resize(size);
     return signature;
@@ -329,10 +307,10 @@ Data SigningKey::sign(ByteView message) const {
 
 std::string toPem(std::string_view label, ByteView der) {
     const BioHandle bio(BIO_new(BIO_s_mem()));
-    require(PEM_write_bio(bio.get(), std::string(label).c_str(), "", unsignedBytes(der.data()),
+    require(PEM_write_bio(bio.get(), std::string(label).c_str(), "", unsignedBytes(der),
                           static_cast<long>(der.size())) > 0,
             "PEM");
-    return contents(bio.get());
+    return textOf(bio.get());
 }
 
 std::string IssuedCertificate::pem() const {
@@ -360,7 +338,8 @@ IssuedCertificate issueCertificate(const CertificateFields& fields, const Issued
     addExtensions(certificate.get(), fields, subjectId, resolve(fields.authorityKeyIdentifier, issuerId));
 
     sign(certificate.get(), signer, fields);
-    IssuedCertificate issued{encoded(certificate.get(), i2d_X509), fields.key, fields.subject, subjectId};
+    IssuedCertificate issued{crypto::encodedBy<X509>(i2d_X509, certificate.get()), fields.key, fields.subject,
+                             subjectId};
     if (fields.edit || fields.version != kOrdinaryVersion) issued.der = edited(issued.der, fields, signer);
     if (fields.corruptSignature) issued.der.back() ^= std::byte{1};
     return issued;
@@ -370,18 +349,18 @@ namespace {
 
 /// (r, n - s) for (r, s), both in DER.
 Data otherSignature(ByteView signature, const SigningKey& signer) {
-    const unsigned char* at = unsignedBytes(signature.data());
-    const EcdsaHandle given(d2i_ECDSA_SIG(nullptr, &at, static_cast<long>(signature.size())));
+    const unsigned char* at = unsignedBytes(signature);
+    const EcdsaSignatureHandle given(d2i_ECDSA_SIG(nullptr, &at, static_cast<long>(signature.size())));
     require(given != nullptr, "no elliptic-curve signature");
     BIGNUM* order = nullptr;
     require(EVP_PKEY_get_bn_param(signer.native(), OSSL_PKEY_PARAM_EC_ORDER, &order) == 1, "no order");
     const NumberHandle owned(order);
     NumberHandle r(BN_dup(ECDSA_SIG_get0_r(given.get())));
     NumberHandle s(BN_new());
-    const EcdsaHandle other(ECDSA_SIG_new());
+    const EcdsaSignatureHandle other(ECDSA_SIG_new());
     require(r && s && other && BN_sub(s.get(), order, ECDSA_SIG_get0_s(given.get())) == 1, "n - s");
     require(ECDSA_SIG_set0(other.get(), r.release(), s.release()) == 1, "signature");
-    return encoded(other.get(), i2d_ECDSA_SIG);
+    return crypto::encodedBy<ECDSA_SIG>(i2d_ECDSA_SIG, other.get());
 }
 
 }  // namespace

@@ -9,25 +9,28 @@
 #include <openssl/x509v3.h>
 
 #include "base/handle.h"
+#include "crypto/openssl.h"
 #include "support/cms_parts.h"
 #include "support/code_directory_builder.h"
-#include "support/openssl_handles.h"
 #include "support/require.h"
 
 namespace pinwell::test {
 
 namespace {
 
-using Message = base::Handle<CMS_ContentInfo, CMS_ContentInfo_free>;
+using crypto::BioHandle;
+using crypto::MessageHandle;
+using crypto::ObjectHandle;
+using crypto::unsignedBytes;
+
 using TstInfo = base::Handle<TS_TST_INFO, TS_TST_INFO_free>;
 using Imprint = base::Handle<TS_MSG_IMPRINT, TS_MSG_IMPRINT_free>;
-using Algorithm = base::Handle<X509_ALGOR, X509_ALGOR_free>;
 using Integer = base::Handle<ASN1_INTEGER, ASN1_INTEGER_free>;
 using Time = base::Handle<ASN1_GENERALIZEDTIME, ASN1_GENERALIZEDTIME_free>;
 
 struct Identity {
-    KeyHandle key;
-    CertificateHandle certificate;
+    crypto::KeyHandle key;
+    crypto::CertificateHandle certificate;
 };
 
 Identity makeIdentity(TestKey kind) {
@@ -48,7 +51,7 @@ Identity makeIdentity(TestKey kind) {
     X509_set_pubkey(certificate, identity.key.get());
     X509V3_CTX context;
     X509V3_set_ctx(&context, certificate, certificate, nullptr, nullptr, 0);
-    const ExtensionHandle identifier(
+    const crypto::ExtensionHandle identifier(
         X509V3_EXT_conf_nid(nullptr, &context, NID_subject_key_identifier, "hash"));
     require(identifier && X509_add_ext(certificate, identifier.get(), -1) == 1, "key identifier");
     require(X509_sign(certificate, identity.key.get(), EVP_sha256()) > 0, "certificate signature");
@@ -65,31 +68,15 @@ BioHandle reader(ByteView bytes) {
     return BioHandle(BIO_new_mem_buf(bytes.data(), static_cast<int>(bytes.size())));
 }
 
-ByteView viewOf(const ASN1_STRING* string) {
-    const auto length = static_cast<std::size_t>(ASN1_STRING_length(string));
-    return std::as_bytes(std::span<const unsigned char>(ASN1_STRING_get0_data(string), length));
-}
-
-template <class T>
-Data encoded(const T* object, int (*encode)(const T*, unsigned char**)) {
-    unsigned char* bytes = nullptr;
-    const int length = encode(object, &bytes);
-    require(length > 0, "encoding");
-    const auto view = std::as_bytes(std::span<const unsigned char>(bytes, static_cast<std::size_t>(length)));
-    Data data = base::toData(view);
-    OPENSSL_free(bytes);
-    return data;
-}
-
-CMS_SignerInfo* signerOf(const Message& message) {
+CMS_SignerInfo* signerOf(const MessageHandle& message) {
     return sk_CMS_SignerInfo_value(CMS_get0_SignerInfos(message.get()), 0);
 }
 
 /// One signer's message over `content`; `flags` of CMS_sign.
-Message signMessage(const Identity& identity, int contentType, ByteView content, unsigned flags,
-                    bool pss = false) {
+MessageHandle signMessage(const Identity& identity, int contentType, ByteView content, unsigned flags,
+                          bool pss = false) {
     flags |= CMS_BINARY | (pss ? CMS_KEY_PARAM : 0U);
-    Message message(CMS_sign(nullptr, nullptr, nullptr, nullptr, flags | CMS_PARTIAL));
+    MessageHandle message(CMS_sign(nullptr, nullptr, nullptr, nullptr, flags | CMS_PARTIAL));
     require(message != nullptr, "message");
     ObjectHandle type(OBJ_dup(OBJ_nid2obj(contentType)));
     require(CMS_set1_eContentType(message.get(), type.get()) == 1, "content type");
@@ -107,12 +94,11 @@ Message signMessage(const Identity& identity, int contentType, ByteView content,
     return message;
 }
 
-void breakSignature(const Message& message) {
+void breakSignature(const MessageHandle& message) {
     ASN1_OCTET_STRING* value = CMS_SignerInfo_get0_signature(signerOf(message));
-    Data bytes = base::toData(viewOf(value));
+    Data bytes = base::toData(crypto::byteView(value));
     bytes.back() ^= std::byte{1};
-    ASN1_OCTET_STRING_set(value, static_cast<const unsigned char*>(static_cast<const void*>(bytes.data())),
-                          static_cast<int>(bytes.size()));
+    ASN1_OCTET_STRING_set(value, unsignedBytes(bytes), static_cast<int>(bytes.size()));
 }
 
 }  // namespace
@@ -150,12 +136,11 @@ TimestampBuilder& TimestampBuilder::asPlainData() {
 Data TimestampBuilder::build(ByteView signatureValue) const {
     const Data digest = codeDigest(imprintDigest_, imprinted_ ? ByteView(*imprinted_) : signatureValue);
     Data octets = digest;
-    const Algorithm algorithm(X509_ALGOR_new());
+    const crypto::AlgorithmHandle algorithm(X509_ALGOR_new());
     X509_ALGOR_set_md(algorithm.get(), imprintDigest_ == 4 ? EVP_sha384() : EVP_sha256());
     const Imprint imprint(TS_MSG_IMPRINT_new());
     TS_MSG_IMPRINT_set_algo(imprint.get(), algorithm.get());
-    TS_MSG_IMPRINT_set_msg(imprint.get(), static_cast<unsigned char*>(static_cast<void*>(octets.data())),
-                           static_cast<int>(octets.size()));
+    TS_MSG_IMPRINT_set_msg(imprint.get(), unsignedBytes(octets), static_cast<int>(octets.size()));
 
     const TstInfo info(TS_TST_INFO_new());
     const ObjectHandle policy(OBJ_txt2obj("1.2.3.4", 1));
@@ -170,11 +155,11 @@ Data TimestampBuilder::build(ByteView signatureValue) const {
                 TS_TST_INFO_set_time(info.get(), time.get()) == 1,
             "time stamp");
 
-    const Message token =
-        signMessage(identityWith(TestKey::rsa2048), plainData_ ? NID_pkcs7_data : NID_id_smime_ct_TSTInfo,
-                    encoded<TS_TST_INFO>(info.get(), i2d_TS_TST_INFO), certificate_ ? 0 : CMS_NOCERTS);
+    const MessageHandle token = signMessage(
+        identityWith(TestKey::rsa2048), plainData_ ? NID_pkcs7_data : NID_id_smime_ct_TSTInfo,
+        crypto::encodedBy<TS_TST_INFO>(i2d_TS_TST_INFO, info.get()), certificate_ ? 0 : CMS_NOCERTS);
     if (broken_) breakSignature(token);
-    return encoded<CMS_ContentInfo>(token.get(), i2d_CMS_ContentInfo);
+    return crypto::encodedBy<CMS_ContentInfo>(i2d_CMS_ContentInfo, token.get());
 }
 
 CmsBuilder::CmsBuilder(Data content) : content_(std::move(content)) {}
@@ -230,16 +215,16 @@ Data CmsBuilder::build() const {
     if (!certificate_) flags |= CMS_NOCERTS;
     if (!signedAttributes_) flags |= CMS_NOATTR;
     if (keyIdentifier_) flags |= CMS_USE_KEYID;
-    const Message message = signMessage(identityWith(key_), NID_pkcs7_data, content_, flags, pss_);
+    const MessageHandle message = signMessage(identityWith(key_), NID_pkcs7_data, content_, flags, pss_);
     CMS_SignerInfo* signer = signerOf(message);
     for (const TimestampBuilder& timestamp : timestamps_) {
-        const Data token = timestamp.build(viewOf(CMS_SignerInfo_get0_signature(signer)));
+        const Data token = timestamp.build(crypto::byteView(CMS_SignerInfo_get0_signature(signer)));
         require(CMS_unsigned_add1_attr_by_NID(signer, NID_id_smime_aa_timeStampToken, V_ASN1_SEQUENCE,
                                               token.data(), static_cast<int>(token.size())) == 1,
                 "time stamp attribute");
     }
     if (broken_) breakSignature(message);
-    const Data der = encoded<CMS_ContentInfo>(message.get(), i2d_CMS_ContentInfo);
+    const Data der = crypto::encodedBy<CMS_ContentInfo>(i2d_CMS_ContentInfo, message.get());
     return ber_ ? withIndefiniteLengths(der, 4) : der;
 }
 

@@ -23,14 +23,17 @@
 #include <thread>
 
 #include "base/handle.h"
+#include "crypto/openssl.h"
 #include "support/certificate_builder.h"
-#include "support/openssl_handles.h"
 #include "support/require.h"
 
 namespace pinwell::test {
 namespace {
 
 using base::FileDescriptor;
+using crypto::BioHandle;
+using crypto::CertificateHandle;
+using crypto::KeyHandle;
 
 constexpr std::size_t kMaximumHead = std::size_t{1} << 20U;
 constexpr std::size_t kMaximumRequest = std::size_t{80} << 20U;

@@ -1,11 +1,11 @@
 // The identity of a session.
 #include "https/session.h"
 
-#include <openssl/bio.h>
 #include <openssl/pem.h>
 
 #include <filesystem>
 
+#include "crypto/openssl.h"
 #include "session_fixture.h"
 
 namespace pinwell::test {
@@ -19,13 +19,11 @@ constexpr const char* kPassphrase = "correct horse";
 
 // PKCS #8, encrypted.
 std::string encryptedPem(const SigningKey& key) {
-    const std::unique_ptr<BIO, int (*)(BIO*)> bio(BIO_new(BIO_s_mem()), BIO_free);
+    const crypto::BioHandle bio(BIO_new(BIO_s_mem()));
     if (PEM_write_bio_PKCS8PrivateKey(bio.get(), key.native(), EVP_aes_256_cbc(), kPassphrase, 13, nullptr,
                                       nullptr) != 1)
         throw std::runtime_error("the key cannot be encrypted");
-    char* text = nullptr;
-    const long length = BIO_get_mem_data(bio.get(), &text);
-    return {text, static_cast<std::size_t>(length)};
+    return crypto::textOf(bio.get());
 }
 
 class ClientIdentityTest : public SessionTest {

@@ -1,14 +1,11 @@
 #include "kept_rsa_keys.h"
 
-#include <openssl/evp.h>
-
 #include <cstdarg>
 #include <map>
-#include <memory>
 #include <string_view>
 #include <utility>
 
-using OwnedKey = std::unique_ptr<EVP_PKEY, decltype(&EVP_PKEY_free)>;
+#include "crypto/openssl.h"
 
 // NOLINTBEGIN(bugprone-reserved-identifier,readability-identifier-naming): the linker gives the names
 extern "C" {
@@ -23,13 +20,13 @@ bool keysAreKept = false;
 int nextKey = 0;
 
 EVP_PKEY* keptKey(std::size_t bits) {
-    static std::map<std::pair<std::size_t, int>, OwnedKey> keys;
+    static std::map<std::pair<std::size_t, int>, crypto::KeyHandle> keys;
     nextKey = 1 - nextKey;
     auto found = keys.find({bits, nextKey});
     if (found == keys.end()) {
         EVP_PKEY* const made = __real_EVP_PKEY_Q_keygen(nullptr, nullptr, "RSA", bits);
         if (made == nullptr) return nullptr;
-        found = keys.emplace(std::pair(bits, nextKey), OwnedKey(made, EVP_PKEY_free)).first;
+        found = keys.emplace(std::pair(bits, nextKey), crypto::KeyHandle(made)).first;
     }
     EVP_PKEY_up_ref(found->second.get());
     return found->second.get();

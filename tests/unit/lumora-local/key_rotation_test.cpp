@@ -43,10 +43,7 @@ Data ticketFrom(const ServiceDirectory& directory) {
 /// Whether a ticket by the directory's signer begins with this certificate.
 bool hasCertificateOf(const Data& ticket, const std::string& pemPath) {
     const auto certificate = test::certificateFromPem(readFile(pemPath));
-    unsigned char* der = nullptr;
-    const int length = i2d_X509(certificate.get(), &der);
-    const std::string wanted(reinterpret_cast<const char*>(der), static_cast<std::size_t>(length));
-    OPENSSL_free(der);
+    const std::string wanted = base::toString(crypto::encodedBy<X509>(i2d_X509, certificate.get()));
     return base::toString(ticket).find(wanted) != std::string::npos;
 }
 
@@ -199,9 +196,7 @@ class CertifiedElsewhere : public Keys {
         const test::BioHandle bio(BIO_new_mem_buf(request.data(), static_cast<int>(request.size())));
         X509_REQ* read = PEM_read_bio_X509_REQ(bio.get(), nullptr, nullptr, nullptr);
         EXPECT_EQ(X509_REQ_verify(read, X509_REQ_get0_pubkey(read)), 1);
-        Data key(static_cast<std::size_t>(i2d_PUBKEY(X509_REQ_get0_pubkey(read), nullptr)));
-        auto* end = reinterpret_cast<unsigned char*>(key.data());
-        i2d_PUBKEY(X509_REQ_get0_pubkey(read), &end);
+        const Data key = crypto::encodedBy<EVP_PKEY>(i2d_PUBKEY, X509_REQ_get0_pubkey(read));
         X509_REQ_free(read);
         return certifySigner(
                    {inAuthority("ticket-intermediate.pem"), inAuthority("ticket-intermediate.key"), ""}, key,

@@ -17,6 +17,7 @@
 #include <stdexcept>
 
 #include "base/handle.h"
+#include "crypto/openssl.h"
 #include "lumora-local/sqlite_store.h"
 #include "lumora-local/ticket_maker.h"
 
@@ -193,12 +194,8 @@ std::string RawClient::readUntil(const std::string& mark, std::size_t count) {
 }
 
 std::string RawClient::serverCertificate() const {
-    X509* certificate = SSL_get1_peer_certificate(connection_->ssl);
-    std::string der(static_cast<std::size_t>(i2d_X509(certificate, nullptr)), '\0');
-    auto* end = reinterpret_cast<unsigned char*>(der.data());
-    i2d_X509(certificate, &end);
-    X509_free(certificate);
-    return der;
+    const crypto::CertificateHandle certificate(SSL_get1_peer_certificate(connection_->ssl));
+    return base::toString(crypto::encodedBy<X509>(i2d_X509, certificate.get()));
 }
 
 void RawClient::drop() {

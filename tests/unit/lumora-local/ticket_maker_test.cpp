@@ -158,8 +158,8 @@ bool verifies(const Container& parts, const std::string& certificate) {
     EVP_MD_CTX* context = EVP_MD_CTX_new();
     EVP_DigestVerifyInit(context, nullptr, EVP_sha256(), nullptr, X509_get0_pubkey(signer.get()));
     const int result =
-        EVP_DigestVerify(context, lumora::test::octets(parts.signature), derLength(parts.signature),
-                         lumora::test::octets(parts.signedData), parts.signedData.size());
+        EVP_DigestVerify(context, crypto::unsignedBytes(parts.signature), derLength(parts.signature),
+                         crypto::unsignedBytes(parts.signedData), parts.signedData.size());
     EVP_MD_CTX_free(context);
     return result == 1;
 }
@@ -197,8 +197,8 @@ TEST_F(TicketSignerTest, ContainsItsChainLeafFirst) {
     EXPECT_EQ(reader.u8("length of length"), 0x82);
     const std::uint16_t length = reader.be16("length");
     EXPECT_EQ(length, reader.remaining());
-    const unsigned char* at = lumora::test::octets(parts.certificates) + reader.position();
-    const unsigned char* end = lumora::test::octets(parts.certificates) + parts.certificates.size();
+    const unsigned char* at = crypto::unsignedBytes(parts.certificates) + reader.position();
+    const unsigned char* end = crypto::unsignedBytes(parts.certificates) + parts.certificates.size();
     for (const Identity* identity :
          {&authority_.ticketSigner, &authority_.ticketIntermediate, &authority_.root}) {
         const lumora::test::CertificateHandle found(d2i_X509(nullptr, &at, end - at));
