@@ -132,8 +132,7 @@ void Case::verifyBytes() {
 void Case::digestFile() {
     try {
         const codesign::FileSource file(base::Places(), absolutePath_);
-        result_.fileDigest =
-            base::toData(verify::digestOf(verify::Algorithm::sha256, file, {0, file.size()}));
+        result_.fileDigest = base::toData(verify::digestOf(crypto::Digest::sha256, file, {0, file.size()}));
     } catch (const codesign::CodeError& error) {
         unreadable(std::string("The file cannot be read: ") + error.what() + ".");
     }

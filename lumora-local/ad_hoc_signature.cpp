@@ -6,9 +6,9 @@
 
 #include "base/byte_io.h"
 #include "base/text.h"
+#include "crypto/crypto.h"
 #include "formats/superblob.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/sha256.h"
 #include "values/format.h"
 #include "values/property_list.h"
 
@@ -92,17 +92,17 @@ Data AdHocSignature::codeDirectory() const {
         .u8(0);
     for (std::uint32_t slot = specialSlots; slot > 0; --slot) {
         const auto component = covered.find(slot);
-        directory.bytes(component == covered.end() ? Data(kDigestSize) : sha256(component->second));
+        directory.bytes(component == covered.end() ? Data(kDigestSize) : crypto::sha256(component->second));
     }
     for (ByteView rest = code; !rest.empty(); rest = rest.subspan(std::min(kPageSize, rest.size()))) {
-        directory.bytes(sha256(rest.first(std::min(kPageSize, rest.size()))));
+        directory.bytes(crypto::sha256(rest.first(std::min(kPageSize, rest.size()))));
     }
     return std::move(directory).take();
 }
 
 Data AdHocSignature::codeHash() const {
     constexpr std::size_t kCodeHashSize = 20;
-    Data hash = sha256(codeDirectory());
+    Data hash = crypto::sha256(codeDirectory());
     hash.resize(kCodeHashSize);
     return hash;
 }
@@ -158,13 +158,14 @@ Dictionary rules() {
 }  // namespace
 
 void ResourceSeal::addFile(const std::string& path, ByteView contents) {
-    if (path.starts_with("Resources/")) files_[path] = sha1(contents);
-    files2_[path] = Dictionary{{"hash", sha1(contents)}, {"hash2", sha256(contents)}};
+    if (path.starts_with("Resources/")) files_[path] = crypto::sha1(contents);
+    files2_[path] = Dictionary{{"hash", crypto::sha1(contents)}, {"hash2", crypto::sha256(contents)}};
 }
 
 void ResourceSeal::addOptionalFile(const std::string& path, ByteView contents) {
-    files_[path] = Dictionary{{"hash", sha1(contents)}, {"optional", true}};
-    files2_[path] = Dictionary{{"hash", sha1(contents)}, {"hash2", sha256(contents)}, {"optional", true}};
+    files_[path] = Dictionary{{"hash", crypto::sha1(contents)}, {"optional", true}};
+    files2_[path] =
+        Dictionary{{"hash", crypto::sha1(contents)}, {"hash2", crypto::sha256(contents)}, {"optional", true}};
 }
 
 void ResourceSeal::addLink(const std::string& path, const std::string& target) {

@@ -2,8 +2,8 @@
 #include <initializer_list>
 
 #include "base/text.h"
+#include "crypto/crypto.h"
 #include "lumora-local/admin_routes.h"
-#include "lumora-local/sha256.h"
 #include "values/format.h"
 #include "values/json.h"
 #include "values/value.h"
@@ -168,7 +168,7 @@ Occasion occasionOf(const AdminRequest& request, const std::string& comment) {
     if (request.idempotencyKey) {
         const std::string all = std::string(request.path) + '\n' + std::string(request.body);
         occasion.request = RequestIdentity{request.head.client, *request.idempotencyKey,
-                                           base::toHex(sha256(base::asBytes(all)))};
+                                           base::toHex(crypto::sha256(base::asBytes(all)))};
     }
     return occasion;
 }

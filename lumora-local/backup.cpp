@@ -107,7 +107,7 @@ class UnfinishedFile {
   public:
     explicit UnfinishedFile(const std::string& finalPath)
         : finalPath_(finalPath), path_(temporarySiblingOf(finalPath)) {
-        writeNewFile(path_, {}, 0600);
+        writeNewFile(path_, {}, kPrivateFileMode);
     }
     ~UnfinishedFile() { ::unlink(path_.c_str()); }
     UnfinishedFile(const UnfinishedFile&) = delete;
@@ -156,7 +156,7 @@ void extractFiles(SQLite::Database& database, const std::string& file, const std
         fs::create_directories(path.parent_path());
         const auto* bytes = static_cast<const std::byte*>(row.getColumn(3).getBlob());
         writeNewFile(path.string(), {bytes, bytes == nullptr ? 0 : static_cast<std::size_t>(size)},
-                     name.ends_with(".key") ? 0600 : 0644);
+                     name.ends_with(".key") ? kPrivateFileMode : kPublicFileMode);
     }
 }
 
@@ -200,9 +200,9 @@ void backUp(const ServiceDirectory& directory, const std::string& file) {
 }
 
 void restore(const std::string& file, const std::string& path) {
-    PendingDirectory pending(path, 0755);
+    PendingDirectory pending(path, kPublicDirectoryMode);
     const std::string service = pending.path() + "/service";
-    makeDirectory(service, 0700);
+    makeDirectory(service, kPrivateDirectoryMode);
     const std::string store = service + "/records.sqlite";
     copyBackup(file, store);
     withDatabase(file, [&] {

@@ -5,10 +5,10 @@
 
 #include "base/bytes.h"
 #include "base/text.h"
+#include "crypto/crypto.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/record_store.h"
 #include "lumora-local/rfc3339.h"
-#include "lumora-local/sha256.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {
@@ -106,7 +106,7 @@ std::string hashOf(const Event& event) {
     append(text, reasonText(event));
     append(text, event.comment);
     append(text, event.ticket);
-    return base::toHex(sha256(base::asBytes(text)));
+    return base::toHex(crypto::sha256(base::asBytes(text)));
 }
 
 bool isBlank(std::string_view comment) {

@@ -9,6 +9,13 @@
 
 namespace pinwell::lumora {
 
+// The modes of new files and directories. "Private" means for the service's own user.
+inline constexpr mode_t kPublicFileMode = 0644;
+inline constexpr mode_t kPrivateFileMode = 0600;
+inline constexpr mode_t kProgramFileMode = 0755;
+inline constexpr mode_t kPublicDirectoryMode = 0755;
+inline constexpr mode_t kPrivateDirectoryMode = 0700;
+
 /// Makes a new file, and flushes it to the disk before it returns. `mode` is subject to the umask. Throws
 /// Failure (EX_CANTCREAT if it cannot be made, EX_IOERR if it cannot be written). Then no new file
 /// remains.

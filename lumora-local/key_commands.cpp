@@ -22,9 +22,6 @@ using values::Date;
 using values::Dictionary;
 using values::format;
 
-constexpr mode_t kCertificateFileMode = 0644;
-constexpr mode_t kKeyFileMode = 0600;
-
 std::string retiredHint(const std::string& key) {
     return format("The earlier key is still in %@; remove it once nothing reads it.", key);
 }
@@ -135,8 +132,8 @@ RotationReport requestNextSigner(const ServiceDirectory& directory, const std::s
     NewFiles files(directory);
     const Identity signer = requestSigner(passphrase.text());
     const std::string key =
-        files.write(freshName(directory, "ticket-signer", now) + ".key", signer.privateKey, kKeyFileMode);
-    files.writeAt(requestFile, signer.certificate, kCertificateFileMode);
+        files.write(freshName(directory, "ticket-signer", now) + ".key", signer.privateKey, kPrivateFileMode);
+    files.writeAt(requestFile, signer.certificate, kPublicFileMode);
     files.flush();
     directory.changeSettings([&](Dictionary& settings) {
         const Dictionary* old = settings["signer"].dictionary();
@@ -162,7 +159,7 @@ void publishRoot(const ServiceDirectory& directory, X509* root, const std::strin
         if (X509_cmp(readCertificateFile(path).get(), root) == 0) return;
     }
     const std::string path = directory.platformPath() + "/roots/" + name + ".pem";
-    files.writeAt(path, encodeCertificate(root), kCertificateFileMode);
+    files.writeAt(path, encodeCertificate(root), kPublicFileMode);
     flushDirectory(directory.platformPath() + "/roots");
     report.push_back(format("Added the root %@ to the platform directory: %@", nameOf(root), path));
     report.emplace_back("Clients need it before they accept tickets that are signed from now on.");
@@ -182,12 +179,12 @@ RotationReport rotateSigner(const ServiceDirectory& directory, const SignerRotat
         Passphrase passphrase;
         readPassphrase(directory, passphrase);
         const Identity signer = issueSigner(issuer, now, passphrase.text());
-        key = files.write(name + ".key", signer.privateKey, kKeyFileMode);
-        certificate = files.write(name + ".pem", signer.certificate, kCertificateFileMode);
+        key = files.write(name + ".key", signer.privateKey, kPrivateFileMode);
+        certificate = files.write(name + ".pem", signer.certificate, kPublicFileMode);
     } else {
         const auto token = openSigningKey(key, {});
         certificate =
-            files.write(name + ".pem", certifySigner(issuer, token->publicKey(), now), kCertificateFileMode);
+            files.write(name + ".pem", certifySigner(issuer, token->publicKey(), now), kPublicFileMode);
     }
     files.flush();
     nameSigner(directory, key, chainWith(directory, certificate), false);
@@ -214,8 +211,8 @@ RotationReport rotateServer(const ServiceDirectory& directory, const std::string
                     directory.hosts(), now, passphrase.text());
     const std::string name = freshName(directory, "server", now);
     NewFiles files(directory);
-    const std::string key = files.write(name + ".key", server.privateKey, kKeyFileMode);
-    const std::string certificate = files.write(name + ".pem", server.certificate, kCertificateFileMode);
+    const std::string key = files.write(name + ".key", server.privateKey, kPrivateFileMode);
+    const std::string certificate = files.write(name + ".pem", server.certificate, kPublicFileMode);
     files.flush();
     directory.changeSettings([&](Dictionary& settings) {
         settings["server"] = Dictionary{{"key", key}, {"certificate", certificate}};
@@ -237,13 +234,11 @@ RotationReport certifySignerElsewhere(const ServiceDirectory& directory, const s
     if (chosen.empty()) chosen = present.key;
     NewFiles files(directory);
     const std::string name = freshName(directory, "ticket-signer", now);
-    const std::string signer =
-        files.write(name + ".pem", encodeCertificate(chain[0].get()), kCertificateFileMode);
+    const std::string signer = files.write(name + ".pem", encodeCertificate(chain[0].get()), kPublicFileMode);
     Array names{signer};
     for (std::size_t i = 1; i < chain.size(); ++i) {
         const std::string suffix = i == 1 ? "-intermediate.pem" : "-root.pem";
-        names.emplace_back(
-            files.write(name + suffix, encodeCertificate(chain[i].get()), kCertificateFileMode));
+        names.emplace_back(files.write(name + suffix, encodeCertificate(chain[i].get()), kPublicFileMode));
     }
     const std::shared_ptr<const SigningKey> opened =
         openSigningKey(chosen, directory.settings().passphraseFile);
@@ -265,14 +260,11 @@ RotationReport certifySignerElsewhere(const ServiceDirectory& directory, const s
 
 namespace {
 
-constexpr mode_t kFolderMode = 0700;
-
 /// Certificate and key under these names, both or none.
 void writePair(const std::string& folder, const std::string& name, const Identity& identity) {
-    PendingDirectory pending(folder, kFolderMode);
-    writeNewFile(pending.path() + "/" + name + ".pem", base::asBytes(identity.certificate),
-                 kCertificateFileMode);
-    writeNewFile(pending.path() + "/" + name + ".key", base::asBytes(identity.privateKey), kKeyFileMode);
+    PendingDirectory pending(folder, kPrivateDirectoryMode);
+    writeNewFile(pending.path() + "/" + name + ".pem", base::asBytes(identity.certificate), kPublicFileMode);
+    writeNewFile(pending.path() + "/" + name + ".key", base::asBytes(identity.privateKey), kPrivateFileMode);
     flushDirectory(pending.path());
     pending.publish();
 }

@@ -2,9 +2,9 @@
 
 #include "base/byte_io.h"
 #include "base/text.h"
+#include "crypto/crypto.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/postgres_tables.h"
-#include "lumora-local/sha256.h"
 #include "lumora-local/store_rules.h"
 #include "values/format.h"
 
@@ -121,7 +121,7 @@ void PostgresBatch::add(Environment environment, const SignedRecord& entry) {
     records_[3].boolean(record.revoked);
     records_[4].number(record.signedAt.seconds);
     if (record.asAsset) {
-        records_[5].text(base::toHex(sha256(entry.ticket)));
+        records_[5].text(base::toHex(crypto::sha256(entry.ticket)));
     } else {
         records_[5].null();
     }

@@ -209,21 +209,21 @@ void writeFramework(const std::string& frameworks, ResourceSeal& outer) {
     const std::string version = framework + "/Versions/A";
     for (const std::string& directory :
          {framework, framework + "/Versions", version, version + "/Resources", version + "/_CodeSignature"})
-        makeDirectory(directory, 0755);
-    writeNewFile(version + "/" + name, program.image, 0755);
-    writeNewFile(version + "/Resources/Info.plist", list, 0644);
-    writeNewFile(version + "/Resources/Greeting.txt", base::asBytes(kGreeting), 0644);
-    writeNewFile(version + "/_CodeSignature/CodeResources", components.resourceSeal, 0644);
+        makeDirectory(directory, kPublicDirectoryMode);
+    writeNewFile(version + "/" + name, program.image, kProgramFileMode);
+    writeNewFile(version + "/Resources/Info.plist", list, kPublicFileMode);
+    writeNewFile(version + "/Resources/Greeting.txt", base::asBytes(kGreeting), kPublicFileMode);
+    writeNewFile(version + "/_CodeSignature/CodeResources", components.resourceSeal, kPublicFileMode);
     makeLink(framework + "/Versions/Current", "A");
     for (const std::string& entry : {name, std::string("Resources")})
         makeLink(framework + "/" + entry, "Versions/Current/" + entry);
 }
 
 void writeResources(const std::string& resources, ResourceSeal& seal) {
-    makeDirectory(resources, 0755);
-    makeDirectory(resources + "/en.lproj", 0755);
-    writeNewFile(resources + "/ReadMe.txt", base::asBytes(kApplicationReadMe), 0644);
-    writeNewFile(resources + "/en.lproj/Greeting.txt", base::asBytes(kGreeting), 0644);
+    makeDirectory(resources, kPublicDirectoryMode);
+    makeDirectory(resources + "/en.lproj", kPublicDirectoryMode);
+    writeNewFile(resources + "/ReadMe.txt", base::asBytes(kApplicationReadMe), kPublicFileMode);
+    writeNewFile(resources + "/en.lproj/Greeting.txt", base::asBytes(kGreeting), kPublicFileMode);
     makeLink(resources + "/Latest.txt", "ReadMe.txt");
     seal.addFile("Resources/ReadMe.txt", base::asBytes(kApplicationReadMe));
     seal.addOptionalFile("Resources/en.lproj/Greeting.txt", base::asBytes(kGreeting));
@@ -233,7 +233,7 @@ void writeResources(const std::string& resources, ResourceSeal& seal) {
 void writeTool(const std::string& programs, ResourceSeal& seal) {
     const std::string name(kTool);
     const Program program = makeProgram(std::string(kBundleIdentifier) + ".tool", {});
-    writeNewFile(programs + "/" + name, program.image, 0755);
+    writeNewFile(programs + "/" + name, program.image, kProgramFileMode);
     seal.addNestedCode("Programs/" + name, program.codeHashes);
 }
 
@@ -243,11 +243,11 @@ std::string writeSampleApplication(const std::string& directory) {
     const std::string name(kName);
     const std::string identifier(kBundleIdentifier);
     std::string path = directory + "/" + name + ".app";
-    PendingDirectory pending(path, 0755);
+    PendingDirectory pending(path, kPublicDirectoryMode);
     const std::string contents = pending.path() + "/Contents";
-    makeDirectory(contents, 0755);
+    makeDirectory(contents, kPublicDirectoryMode);
     for (const char* const part : {"/Frameworks", "/Programs", "/_CodeSignature"})
-        makeDirectory(contents + part, 0755);
+        makeDirectory(contents + part, kPublicDirectoryMode);
 
     ResourceSeal seal;
     writeFramework(contents + "/Frameworks", seal);
@@ -255,9 +255,9 @@ std::string writeSampleApplication(const std::string& directory) {
     writeTool(contents + "/Programs", seal);
     const SealedComponents components{.informationPropertyList = information(name, identifier, "APPL"),
                                       .resourceSeal = seal.document()};
-    writeNewFile(contents + "/Info.plist", components.informationPropertyList, 0644);
-    writeNewFile(contents + "/Programs/" + name, makeProgram(identifier, components).image, 0755);
-    writeNewFile(contents + "/_CodeSignature/CodeResources", components.resourceSeal, 0644);
+    writeNewFile(contents + "/Info.plist", components.informationPropertyList, kPublicFileMode);
+    writeNewFile(contents + "/Programs/" + name, makeProgram(identifier, components).image, kProgramFileMode);
+    writeNewFile(contents + "/_CodeSignature/CodeResources", components.resourceSeal, kPublicFileMode);
     pending.publish();
     return path;
 }

@@ -250,7 +250,7 @@ Data makeDiskImage(ImageSignature signature) {
 std::string writeSampleDiskImage(const std::string& directory, const std::string& name,
                                  ImageSignature signature) {
     std::string path = directory + "/" + name;
-    writeNewFile(path, makeDiskImage(signature), 0644);
+    writeNewFile(path, makeDiskImage(signature), kPublicFileMode);
     return path;
 }
 

@@ -17,10 +17,10 @@
 
 #include "base/byte_io.h"
 #include "base/text.h"
+#include "crypto/crypto.h"
 #include "lumora-local/certificates.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/samples.h"
-#include "lumora-local/sha256.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -117,7 +117,7 @@ std::string describe(const ArchivedFile& file, std::size_t number, std::size_t o
         "   </data>\n"
         "  </file>\n",
         number, file.name, archived.size(), offset, file.contents.size(), encoding,
-        base::toHex(sha1(archived)), base::toHex(sha1(base::asBytes(file.contents))));
+        base::toHex(crypto::sha1(archived)), base::toHex(crypto::sha1(base::asBytes(file.contents))));
 }
 
 std::string tableOfContents(const std::string& keyInfo, std::size_t signatureSize) {
@@ -145,7 +145,7 @@ Data makePackage(Date now) {
     const std::size_t signatureSize = signer.sign(Data(kChecksumSize)).size();
     const std::string table = tableOfContents(signer.keyInfo(), signatureSize);
     const Data stream = deflated(base::asBytes(table));
-    const Data checksum = sha1(stream);
+    const Data checksum = crypto::sha1(stream);
     const Data signature = signer.sign(checksum);
     if (signature.size() != signatureSize) throw Failure(EX_SOFTWARE, "signatures of different lengths");
 
@@ -158,7 +158,7 @@ Data makePackage(Date now) {
 
 std::string writeSamplePackage(const std::string& directory, const std::string& name, Date now) {
     std::string path = directory + "/" + name;
-    writeNewFile(path, makePackage(now), 0644);
+    writeNewFile(path, makePackage(now), kPublicFileMode);
     return path;
 }
 

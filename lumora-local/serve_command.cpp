@@ -184,7 +184,7 @@ void announce(const ServiceDirectory& directory, const ServeOptions& options, co
             format("%@/platform.json sends clients to %@; with --update-platform it names this service",
                    directory.platformPath(), toString(advertised)));
     }
-    if (options.readyFile) replaceFile(*options.readyFile, base::asBytes(url + "\n"), 0644);
+    if (options.readyFile) replaceFile(*options.readyFile, base::asBytes(url + "\n"), kPublicFileMode);
 }
 
 std::optional<AdminOptions> adminOf(const ServiceDirectory& directory) {

@@ -29,10 +29,6 @@ using values::Dictionary;
 using values::format;
 using values::Value;
 
-constexpr mode_t kPublicDirectoryMode = 0755;
-constexpr mode_t kPrivateDirectoryMode = 0700;
-constexpr mode_t kPublicFileMode = 0644;
-constexpr mode_t kPrivateFileMode = 0600;
 constexpr std::size_t kMaximumDescriptionSize = 1024 * 1024;
 
 constexpr std::string_view kHostsKey = "hosts";

@@ -5,11 +5,11 @@
 #include <functional>
 #include <mutex>
 
+#include "crypto/crypto.h"
 #include "lumora-local/event.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/postgres_pool.h"
 #include "lumora-local/postgres_store.h"
-#include "lumora-local/sha256.h"
 #include "lumora-local/sqlite_store.h"
 #include "values/format.h"
 
@@ -155,7 +155,7 @@ class RunningDigest {
   public:
     void add(const std::string& item) {
         const std::string text = base::toString(digest_) + item;
-        digest_ = sha256(asBytes(text));
+        digest_ = crypto::sha256(asBytes(text));
     }
     const Data& value() const noexcept { return digest_; }
 
@@ -182,7 +182,7 @@ std::string fieldsOf(Environment environment, const SignedRecord& entry) {
         appendField(text, base::toString(hash.hash));
     }
     text += 't';
-    appendField(text, base::toString(sha256(entry.ticket)));
+    appendField(text, base::toString(crypto::sha256(entry.ticket)));
     return text;
 }
 

@@ -17,11 +17,11 @@
 #include <system_error>
 
 #include "base/handle.h"
+#include "crypto/crypto.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/key_file.h"
 #include "lumora-local/openssl.h"
 #include "lumora-local/service_settings.h"
-#include "lumora-local/sha256.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {
@@ -131,7 +131,7 @@ class KeyBehindProcess final : public SigningKey {
     Data publicKey() const override { return publicKey_; }
 
     Data sign(ByteView message) const override {
-        const Data digest = sha256(message);
+        const Data digest = crypto::sha256(message);
         const std::lock_guard lock(mutex_);
         if (!ours_ || !writeFully(ours_.get(), digest)) failTalking();
         return receive();

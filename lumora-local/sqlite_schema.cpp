@@ -5,9 +5,9 @@
 
 #include "base/bytes.h"
 #include "base/text.h"
+#include "crypto/crypto.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
-#include "lumora-local/sha256.h"
 #include "lumora-local/sqlite_tables.h"
 #include "values/date.h"
 #include "values/format.h"
@@ -106,7 +106,7 @@ void setVersion(SQLite::Database& database) {
 /// A copy at the last commit, through a separate connection: the caller's transaction continues.
 void keepCopy(const std::string& path, int version) {
     const std::string copy = freeName(path, ".version-" + std::to_string(version));
-    writeNewFile(copy, {}, 0600);
+    writeNewFile(copy, {}, kPrivateFileMode);
     try {
         SQLite::Database reader(path, SQLite::OPEN_READWRITE, kBusyTimeoutMilliseconds);
         SQLite::Statement statement(reader, "VACUUM INTO ?");
@@ -137,7 +137,7 @@ void logExistingRecords(SQLite::Database& database) {
         event.actor = "lumora-local";
         event.comment = "brought forward from a store without events";
         const SQLite::Column ticket = row.getColumn(5);
-        event.ticket = base::toHex(sha256(
+        event.ticket = base::toHex(crypto::sha256(
             {static_cast<const std::byte*>(ticket.getBlob()), static_cast<std::size_t>(ticket.getBytes())}));
         event.previous = previous;
         event.hash = hashOf(event);

@@ -7,9 +7,9 @@
 #include <utility>
 
 #include "base/text.h"
+#include "crypto/crypto.h"
 #include "lumora-local/failure.h"
 #include "lumora-local/file_writing.h"
-#include "lumora-local/sha256.h"
 #include "lumora-local/sqlite_tables.h"
 #include "lumora-local/store_rules.h"
 #include "values/date.h"
@@ -114,7 +114,7 @@ void insertRecord(SQLite::Database& database, Environment environment, const Sig
     statement.bind(3, record.label);
     statement.bind(4, record.revoked ? 1 : 0);
     statement.bind(5, record.signedAt.seconds);
-    if (record.asAsset) statement.bind(6, base::toHex(sha256(entry.ticket)));
+    if (record.asAsset) statement.bind(6, base::toHex(crypto::sha256(entry.ticket)));
     bindBlob(statement, 7, entry.ticket);
     statement.exec();
 }
@@ -167,7 +167,7 @@ Record readRecord(SQLite::Database& database, Environment environment, SQLite::S
 }  // namespace
 
 void SqliteStore::create(const std::string& path) {
-    writeNewFile(path, {}, 0600);  // SQLite gives the files that it adds the mode of this one
+    writeNewFile(path, {}, kPrivateFileMode);  // SQLite gives the files that it adds the mode of this one
     guarded([&] {
         SQLite::Database database(path, SQLite::OPEN_READWRITE, kBusyTimeoutMilliseconds);
         configureSqlite(database);
@@ -356,7 +356,7 @@ void SqliteStore::walkHistory(const HistoryVisitor& visitor) {
             state.environment =
                 parseEnvironment(records.getColumn(0).getString()).value_or(Environment::production);
             state.name = records.getColumn(1).getString();
-            state.ticket = base::toHex(sha256(bytesOf(records.getColumn(2))));
+            state.ticket = base::toHex(crypto::sha256(bytesOf(records.getColumn(2))));
             state.revoked = records.getColumn(3).getInt() != 0;
             if (!records.getColumn(4).isNull()) {
                 state.lastTicket = records.getColumn(4).getString();

@@ -4,8 +4,8 @@
 #include <set>
 
 #include "base/text.h"
+#include "crypto/crypto.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/sha256.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {
@@ -64,7 +64,7 @@ Event makeEvent(Environment environment, const SignedRecord& entry, Action actio
     event.label = entry.record.label;
     if (action == Action::revoked) event.reason = occasion.reason.value_or(Reason::unspecified);
     event.comment = occasion.comment;
-    event.ticket = base::toHex(sha256(entry.ticket));
+    event.ticket = base::toHex(crypto::sha256(entry.ticket));
     event.previous = std::move(previous);
     event.hash = hashOf(event);
     return event;

@@ -60,7 +60,7 @@ struct Described {
     std::optional<std::uint64_t> offset;
     std::optional<std::uint64_t> length;
     std::optional<Data> checksum;
-    std::optional<Algorithm> algorithm;
+    std::optional<crypto::Digest> algorithm;
     bool isAmbiguous = false;
     bool saysAnything = false;
 

@@ -42,7 +42,7 @@ struct ArchivedData {
     std::size_t file = 0;  // index of its file
     bool isAttribute = false;
     codesign::FileRange range;
-    std::optional<Algorithm> algorithm;
+    std::optional<crypto::Digest> algorithm;
     Data checksum;
     std::string problem;  // why it cannot be checked; empty if it can
 };
@@ -92,7 +92,7 @@ class ArchiveTableReader {
 struct Archive {
     std::uint64_t heapStart = 0;
     ArchiveTable table;
-    std::optional<Algorithm> algorithm;
+    std::optional<crypto::Digest> algorithm;
     Data computed;  // checksum of the table
 };
 

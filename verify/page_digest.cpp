@@ -23,7 +23,8 @@ bool readPieces(const codesign::ByteSource& source, const codesign::FileRange& r
     return true;
 }
 
-ByteView digestOf(Algorithm algorithm, const codesign::ByteSource& source, const codesign::FileRange& range) {
+ByteView digestOf(crypto::Digest algorithm, const codesign::ByteSource& source,
+                  const codesign::FileRange& range) {
     crypto::Hasher& digest = crypto::threadHasher(algorithm);
     digest.begin();
     readPieces(source, range, [&](ByteView piece) {

@@ -7,7 +7,6 @@
 
 #include "base/bytes.h"
 #include "codesign/byte_source.h"
-#include "codesign/code_directory.h"
 #include "codesign/executable_image.h"
 #include "crypto/crypto.h"
 
@@ -15,9 +14,6 @@ namespace pinwell::verify {
 
 using base::ByteView;
 using base::Data;
-
-using Algorithm = crypto::Digest;
-using codesign::algorithmOf;
 
 /// The thread's own buffer of `kBufferSize` bytes. A function that uses it must not call another that does.
 inline constexpr std::size_t kBufferSize = std::size_t{512} * 1024;
@@ -30,7 +26,8 @@ bool readPieces(const codesign::ByteSource& source, const codesign::FileRange& r
 
 /// The digest of a range of a source, with the thread's hasher and buffer; valid until that hasher is used
 /// again. Throws codesign::CodeError.
-ByteView digestOf(Algorithm algorithm, const codesign::ByteSource& source, const codesign::FileRange& range);
+ByteView digestOf(crypto::Digest algorithm, const codesign::ByteSource& source,
+                  const codesign::FileRange& range);
 
 /// Whether a range of a source is all zero. Uses the thread's buffer. Throws codesign::CodeError.
 bool isZero(const codesign::ByteSource& source, const codesign::FileRange& range);

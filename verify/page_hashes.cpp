@@ -70,7 +70,7 @@ class PageCheck {
             const std::uint64_t size = pageSize(directory, code_.length);
             const std::uint64_t begin = page * size;
             const std::uint64_t end = begin + std::min(size, code_.length - begin);
-            const ByteView found = digestOf(algorithmOf(directory.content.digestType()), source_,
+            const ByteView found = digestOf(codesign::algorithmOf(directory.content.digestType()), source_,
                                             {code_.offset + begin, end - begin});
             compare(directory, static_cast<std::uint32_t>(page), begin, end - begin, found);
         });
@@ -110,7 +110,7 @@ class PageCheck {
     };
 
     void checkPart(const Directory& directory, std::uint64_t begin, ByteView bytes) {
-        crypto::Hasher& digest = crypto::threadHasher(algorithmOf(directory.content.digestType()));
+        crypto::Hasher& digest = crypto::threadHasher(codesign::algorithmOf(directory.content.digestType()));
         const std::size_t size = std::size_t{1} << directory.pageShift;
         auto page = static_cast<std::uint32_t>(begin >> directory.pageShift);
         for (std::size_t at = 0; at < bytes.size(); at += size, ++page) {

@@ -214,7 +214,7 @@ void SealedFiles::hashOne(const Job& job) {
     try {
         const auto file = job.directory->file(job.name);
         const ByteView found =
-            digestOf(isSha256 ? Algorithm::sha256 : Algorithm::sha1, *file, {0, file->size()});
+            digestOf(isSha256 ? crypto::Digest::sha256 : crypto::Digest::sha1, *file, {0, file->size()});
         const bool isSame =
             std::equal(found.begin(), found.end(), job.entry->digest.begin(), job.entry->digest.end());
         if (!isSame) report(Outcome::failed, job, base::toHex(found));

@@ -52,7 +52,14 @@ Hasher& threadHasher(Digest digest);
 /// The digest of the bytes. Throws like Hasher.
 Data digestOf(Digest digest, ByteView bytes);
 
-/// The same; `nullopt` if the digest is not available.
+inline Data sha1(ByteView bytes) {
+    return digestOf(Digest::sha1, bytes);
+}
+inline Data sha256(ByteView bytes) {
+    return digestOf(Digest::sha256, bytes);
+}
+
+/// As digestOf(); `nullopt` if the digest is not available.
 std::optional<Data> availableDigestOf(Digest digest, ByteView bytes);
 
 /// Makes OpenSSL wipe all memory that it frees; by default it wipes only some copies of a key. For a process

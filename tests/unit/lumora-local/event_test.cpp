@@ -7,7 +7,7 @@
 
 #include "base/bytes.h"
 #include "base/text.h"
-#include "lumora-local/sha256.h"
+#include "crypto/crypto.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -34,7 +34,7 @@ TEST(EventHash, IsTakenOverEachFieldWithItsLength) {
                              ",20:2026-11-18T11:06:40Z,5:alice,7:revoked,10:production,6:2/2/00,5:A.app,"
                              "11:compromised,8:key lost,64:" +
                              std::string(64, 'a') + ",";
-    EXPECT_EQ(hashOf(revocation()), base::toHex(sha256(base::asBytes(text))));
+    EXPECT_EQ(hashOf(revocation()), base::toHex(crypto::sha256(base::asBytes(text))));
 }
 
 TEST(EventHash, ChangesWithEveryField) {

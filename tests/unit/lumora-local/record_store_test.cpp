@@ -8,9 +8,9 @@
 #include <thread>
 
 #include "base/text.h"
+#include "crypto/crypto.h"
 #include "lumora-local/event.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/sha256.h"
 #include "lumora-local/store_rules.h"
 #include "sample_record.h"
 #include "store_kinds.h"
@@ -46,14 +46,14 @@ TEST_P(RecordStoreTest, DeliversATicketAsAnAsset) {
     ASSERT_TRUE(delivery && delivery->asset);
     EXPECT_FALSE(delivery->inlineTicket);
     EXPECT_EQ(delivery->asset->size, 6U);
-    EXPECT_EQ(delivery->asset->identifier, base::toHex(sha256(base::toData("ticket"))));
+    EXPECT_EQ(delivery->asset->identifier, base::toHex(crypto::sha256(base::toData("ticket"))));
     EXPECT_EQ(store.findAsset(delivery->asset->identifier), base::toData("ticket"));
 }
 
 TEST_P(RecordStoreTest, HasNoAssetForAnInlineTicket) {
     RecordStore& store = openAndKeep();
     store.put(kProduction, {makeRecord("a", "ticket")}, kOccasion);
-    EXPECT_EQ(store.findAsset(base::toHex(sha256(base::toData("ticket")))), std::nullopt);
+    EXPECT_EQ(store.findAsset(base::toHex(crypto::sha256(base::toData("ticket")))), std::nullopt);
 }
 
 TEST_P(RecordStoreTest, WithdrawsTheAssetOfAReplacedRecord) {
@@ -184,7 +184,7 @@ TEST_P(RecordStoreTest, LogsEachChangeOfARecord) {
     EXPECT_EQ(events[2].reason, Reason::compromised);
     EXPECT_EQ(events[2].comment, "key lost");
     EXPECT_EQ(events[2].label, "Sample.app");
-    EXPECT_EQ(events[2].ticket, base::toHex(sha256(base::toData("revoked ticket"))));
+    EXPECT_EQ(events[2].ticket, base::toHex(crypto::sha256(base::toData("revoked ticket"))));
     EXPECT_EQ(events[0].previous, hashBeforeTheFirstEvent());
     EXPECT_EQ(events[3].previous, events[2].hash);
     EXPECT_EQ(events[3].hash, hashOf(events[3]));

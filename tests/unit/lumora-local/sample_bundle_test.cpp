@@ -9,8 +9,8 @@
 #include "base/byte_io.h"
 #include "base/bytes.h"
 #include "base/text.h"
+#include "crypto/crypto.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/sha256.h"
 #include "support/temporary_directory.h"
 #include "values/bundle.h"
 #include "values/property_list.h"
@@ -109,18 +109,18 @@ TEST_P(SignedImage, MatchesItsCodeDirectory) {
     // Special slots count down to the code hashes.
     ASSERT_EQ(special, 3U);
     reader.seek(hashes - 3U * 32U, "special slots");
-    EXPECT_EQ(reading(reader, 32), sha256(kComponents.resourceSeal));
+    EXPECT_EQ(reading(reader, 32), crypto::sha256(kComponents.resourceSeal));
     reader.skip(32, "slot 3");
-    EXPECT_EQ(reading(reader, 32), sha256(blobs_[2]));
+    EXPECT_EQ(reading(reader, 32), crypto::sha256(blobs_[2]));
     reader.skip(32, "slot 2");
-    EXPECT_EQ(reading(reader, 32), sha256(kComponents.informationPropertyList));
+    EXPECT_EQ(reading(reader, 32), crypto::sha256(kComponents.informationPropertyList));
     reader.skip(32, "slot 1");
 
     ASSERT_EQ(std::size_t{limit}, image_.size() - signatureOf(image_).size());
     ASSERT_EQ(code, limit / 4096U);
     for (std::uint32_t page = 0; page < code; ++page) {
         EXPECT_EQ(base::toData(reader.bytes(32, "page")),
-                  sha256(ByteView(image_).subspan(std::size_t{page} * 4096, 4096)));
+                  crypto::sha256(ByteView(image_).subspan(std::size_t{page} * 4096, 4096)));
     }
     EXPECT_TRUE(reader.atEnd());
 }
@@ -174,7 +174,7 @@ TEST(SampleApplication, IsSignedOverItsOwnPropertyList) {
     codeDirectory.seek(16, "hash offset");
     const std::uint32_t hashes = codeDirectory.be32("hash offset");
     codeDirectory.seek(hashes - 32U, "slot 1");
-    EXPECT_EQ(reading(codeDirectory, 32), sha256(base::toData(readFile(contents + "/Info.plist"))));
+    EXPECT_EQ(reading(codeDirectory, 32), crypto::sha256(base::toData(readFile(contents + "/Info.plist"))));
 }
 
 TEST(SampleApplication, OverwritesNothing) {

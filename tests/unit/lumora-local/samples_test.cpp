@@ -5,9 +5,9 @@
 #include <filesystem>
 
 #include "base/byte_io.h"
+#include "crypto/crypto.h"
 #include "fixed_now.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/sha256.h"
 #include "support/temporary_directory.h"
 
 namespace pinwell::lumora {
@@ -94,8 +94,8 @@ TEST(SampleDiskImage, IsSignedOverItsTrailerAndEveryPageOfItsData) {
         reader.seek(start + offset, "digest");
         return base::toData(reader.bytes(32, "digest"));
     };
-    EXPECT_EQ(digestAt(hashes), sha256(base::ByteView(plain).first(end)));
-    EXPECT_EQ(digestAt(hashes - 6U * 32U), sha256(base::ByteView(plain).subspan(end)));
+    EXPECT_EQ(digestAt(hashes), crypto::sha256(base::ByteView(plain).first(end)));
+    EXPECT_EQ(digestAt(hashes - 6U * 32U), crypto::sha256(base::ByteView(plain).subspan(end)));
 }
 
 TEST(SamplePackage, BeginsWithAnArchivesHeader) {

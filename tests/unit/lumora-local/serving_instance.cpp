@@ -13,8 +13,8 @@
 
 #include "base/handle.h"
 #include "base/text.h"
+#include "crypto/crypto.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/sha256.h"
 #include "running_service.h"
 #include "values/json.h"
 #include "values/value.h"
@@ -207,7 +207,7 @@ std::vector<std::string> Load::lost(RecordStore& store) const {
     for (const auto& subject : subjects_) {
         for (const int state : subject->all) {
             const Data ticket = stateOf(subject->name, state).ticket;
-            if (!logged.contains({subject->name, base::toHex(sha256(ticket))})) {
+            if (!logged.contains({subject->name, base::toHex(crypto::sha256(ticket))})) {
                 lost.push_back(subject->name + ", put " + std::to_string(state) + ": not in the log");
             }
         }

@@ -6,8 +6,8 @@
 
 #include <csignal>
 
+#include "crypto/crypto.h"
 #include "lumora-local/failure.h"
-#include "lumora-local/sha256.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -53,7 +53,7 @@ TEST(SigningProcess, SignsTheDigestOfEachMessage) {
     const auto key = keyWith([](const Data&) {});
     EXPECT_EQ(key->publicKey(), base::toData("public"));
     for (const char* message : {"one", "two"})
-        EXPECT_EQ(key->sign(base::asBytes(message)), sha256(base::asBytes(message)));
+        EXPECT_EQ(key->sign(base::asBytes(message)), crypto::sha256(base::asBytes(message)));
 }
 
 TEST(SigningProcess, PassesOnTheTokensError) {
