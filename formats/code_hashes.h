@@ -29,5 +29,8 @@ std::vector<CodeHash> listableHashes(const CodeHash& own, const std::vector<Code
 /// The name of the record that holds the ticket for a code hash: "2/ALGORITHM/HEX", or "1/HEX" if the
 /// algorithm is 0.
 std::string recordNameForHash(std::uint32_t algorithm, base::ByteView hash);
+inline std::string recordNameForHash(const CodeHash& hash) {
+    return recordNameForHash(hash.algorithm, hash.hash);
+}
 
 }  // namespace pinwell

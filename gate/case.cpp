@@ -80,11 +80,11 @@ bool Case::judgeStapled() {
     placeFault_ = file_->ticketPlaceFault();
     // The tool stops here: such a file has no hash and no ticket.
     if (file_->appropriateExitCode() != kExitOK) return false;
-    codeHash_ = file_->cdHash();
-    if (codeHash_) {
-        result_.codeHash = *codeHash_;
-        result_.digestType = file_->digestAlgorithm();
-        result_.recordName = recordNameForHash(result_.digestType, *codeHash_);
+    if (auto hash = codeHashOf(*file_)) {
+        result_.recordName = recordNameForHash(*hash);
+        result_.digestType = hash->algorithm;
+        result_.codeHash = hash->hash;
+        codeHash_ = std::move(hash->hash);
     }
     const std::optional<base::Data> bytes = file_->ticketData();
     if (!bytes || placeFault_) return false;

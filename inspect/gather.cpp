@@ -34,10 +34,10 @@ std::string reasonOf(const base::Error& error) {
 }
 
 void setHash(PWHashedFile& file, Report& report) {
-    const std::optional<Data> hash = file.cdHash();
+    const std::optional<CodeHash> hash = codeHashOf(file);
     if (!hash) return;
-    report.codeHash = Hash{file.digestAlgorithm(), *hash};
-    report.recordName = recordNameForHash(report.codeHash->algorithm, *hash);
+    report.codeHash = Hash{hash->algorithm, hash->hash};
+    report.recordName = recordNameForHash(*hash);
 }
 
 /// The fault of a place, as the report shows it.
@@ -85,8 +85,7 @@ void concludeWithoutTicket(const std::optional<TicketPlaceFault>& fault, Report&
     } else if (fault->isAbsence) {
         report.conclusion = "No ticket is stapled to this file: " + fault->rule + ".";
     } else {
-        const auto* const image = std::get_if<SuperblobPlace>(&report.place);
-        report.outcome = image != nullptr && !image->isReadable ? Outcome::unreadable : Outcome::refused;
+        report.outcome = Outcome::refused;
         report.conclusion = "No ticket can be read: " + fault->rule + ".";
     }
 }
@@ -140,12 +139,11 @@ std::optional<TicketPlaceFault> Inspector::gatherImage(const URL& url, Report& r
     report.code = codesign::describeCode(url.path());
     PWHashedDiskImage image(url, platform_);
     SuperblobPlace place;
-    place.isReadable = image.appropriateExitCode() == kExitOK;
-    if (place.isReadable) {
-        setHash(image, report);
+    setHash(image, report);
+    if (report.codeHash) {
         const codesign::SliceDescription* const code = report.code->preferredSlice();
         const bool isSigned = code != nullptr && code->signature && !code->signature->directories.empty();
-        report.isMadeUpHash = report.codeHash && !isSigned;
+        report.isMadeUpHash = !isSigned;
     }
 
     const auto fault = image.ticketPlaceFault();
@@ -262,6 +260,8 @@ Report Inspector::inspect(const std::string& path) const {
     } else {
         concludeWithoutTicket(fault, report);
     }
+    // The conclusion says more than the tool, which does not read the ticket of such an artefact.
+    if (report.kind != Kind::ticket && !report.codeHash) report.outcome = Outcome::unreadable;
     return report;
 }
 

@@ -98,9 +98,9 @@ int run(int argc, char** argv) {
         ->required();
     app.add_flag("--json", arguments.asJson, "Print one JSON object a path, each on a line");
     app.footer(
-        "Exit status: 0 every ticket is good; 65 a ticket is missing or not acceptable; 66 a path, or the\n"
-        "signature area of a disk image, cannot be read, or the path is nothing that carries a ticket;\n"
-        "64 wrong usage. Of several paths the highest counts.");
+        "Exit status: 0 every ticket is good; 65 a ticket is missing or not acceptable; 66 a path cannot\n"
+        "be read, is nothing that carries a ticket, or has no valid signature; 64 wrong usage. Of several\n"
+        "paths the highest counts.");
     try {
         app.parse(argc, argv);
     } catch (const CLI::Success& request) {

@@ -71,7 +71,6 @@ struct SuperblobPlace {
     std::vector<codesign::BlobDescription> blobs;
     std::size_t blobCount = 0;  // as stated
     std::optional<Fault> fault;
-    bool isReadable = true;  // false: trailer or superblob is damaged, and the tool ends with 66
 };
 
 /// One record after a package's archive; the last one is first in the list.
@@ -170,7 +169,7 @@ enum class Outcome {
     noTicket,    // none is stapled
     refused,     // the ticket is not acceptable
     revoked,     // genuine, and marked as revoked
-    unreadable,  // the path or an image's signature cannot be read, or the path is of a kind without tickets
+    unreadable,  // the path cannot be read, is of a kind without tickets, or has no valid signature
 };
 
 struct Report {

@@ -118,10 +118,10 @@ class Assessor {
     void readHashAndTicket() {
         // The tool stops here: such a file has no hash and no ticket.
         if (file_->appropriateExitCode() != kExitOK) return;
-        found_.codeHash = file_->cdHash();
-        if (found_.codeHash) {
-            found_.digestType = file_->digestAlgorithm();
-            found_.recordName = recordNameForHash(found_.digestType, *found_.codeHash);
+        if (auto hash = codeHashOf(*file_)) {
+            found_.recordName = recordNameForHash(*hash);
+            found_.digestType = hash->algorithm;
+            found_.codeHash = std::move(hash->hash);
         }
         found_.ticket = file_->ticketData();
     }
@@ -259,10 +259,9 @@ LocatedTicket findTicket(const std::string& path) {
 std::string recordNameOfFile(const std::string& path) {
     const LocalPlatform platform(nullptr, 0);
     const verify::OpenedArtefact artefact = opened(URL::fileURLWithPath(path), platform.services());
-    const auto hash =
-        artefact.file->appropriateExitCode() == kExitOK ? artefact.file->cdHash() : std::nullopt;
+    const auto hash = codeHashOf(*artefact.file);
     if (!hash) throw Failure{PINWELL_ERROR_NOT_SIGNED, "there is no valid signature"};
-    return recordNameForHash(artefact.file->digestAlgorithm(), *hash);
+    return recordNameForHash(*hash);
 }
 
 }  // namespace pinwell::library

@@ -225,8 +225,7 @@ std::optional<Outcome> ArtefactRun::open(const PWHashedFile::BeforeReading& befo
         }
         filesState_ = stateOfFiles();
     }
-    if (const auto hash = reading.file->cdHash())
-        recordName_ = recordNameForHash(reading.file->digestAlgorithm(), *hash);
+    if (const auto hash = codeHashOf(*reading.file)) recordName_ = recordNameForHash(*hash);
 
     reading.controller = std::make_unique<DownloadDelegate>(reading.file, reading.platform);
     reading.controller->setOperation(operation_);

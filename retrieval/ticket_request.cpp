@@ -45,7 +45,7 @@ bool isLoss(const base::Error& error) {
 }
 
 std::string nameOf(const CodeHash& hash) {
-    return recordNameForHash(hash.algorithm, hash.hash);
+    return recordNameForHash(hash);
 }
 
 base::Result<base::Data> bodyOf(const TicketWish& wish) {

@@ -93,10 +93,10 @@ OpenedArtefact openArtefact(const std::string& path, std::string_view operation,
     if (opened.report.exitStatus != kExitOK) return opened;
     opened.report.cause = Cause::worked;
     opened.file = file;
-    if (const auto hash = file->cdHash()) {
-        opened.hash = *hash;
-        opened.algorithm = file->digestAlgorithm();
-        opened.report.recordName = recordNameForHash(opened.algorithm, opened.hash);
+    if (auto hash = codeHashOf(*file)) {
+        opened.report.recordName = recordNameForHash(*hash);
+        opened.algorithm = hash->algorithm;
+        opened.hash = std::move(hash->hash);
     }
     return opened;
 }

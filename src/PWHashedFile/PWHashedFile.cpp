@@ -203,4 +203,11 @@ bool PWHashedFile::_writeNewTicketDataFromURL(const std::optional<URL>&, const U
     mustOverride("_writeNewTicketDataFromURL:intoURL:deleteExisting:error:");
 }
 
+std::optional<CodeHash> codeHashOf(PWHashedFile& file) {
+    if (file.appropriateExitCode() != kExitOK) return std::nullopt;
+    std::optional<Data> hash = file.cdHash();
+    if (!hash) return std::nullopt;
+    return CodeHash{file.digestAlgorithm(), *std::move(hash)};
+}
+
 }  // namespace pinwell

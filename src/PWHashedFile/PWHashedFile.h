@@ -14,6 +14,7 @@
 
 #include "base/bytes.h"
 #include "base/error.h"
+#include "formats/code_hashes.h"
 #include "formats/explain_ticket.h"
 #include "src/PWHashedFile/file_kind.h"
 #include "src/platform.h"
@@ -165,5 +166,10 @@ class PWHashedFile {
     std::optional<Data> internalTicketData_;  // empty: read, and none found
     std::optional<Data> internalCDHash_;      // the same
 };
+
+/// The hash that a ticket for the artefact must list. `nullopt` if the artefact cannot be read or has no
+/// valid signature. Then no ticket can be judged, whatever is stapled to it: every program ends with
+/// kExitNoInput.
+std::optional<CodeHash> codeHashOf(PWHashedFile& file);
 
 }  // namespace pinwell

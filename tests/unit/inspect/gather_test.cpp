@@ -96,12 +96,27 @@ TEST_F(Inspection, OfABundleWithALinkForATicketFileReadsNoTicket) {
 TEST_F(Inspection, OfAnUnsignedBundleSaysThatNoTicketCanListIt) {
     const std::string path = platform.directory / "Bare.app";
     BundleBuilder().executable(ExecutableImageBuilder().withoutSignature().build()).write(path);
-    EXPECT_EQ(inspect(path).conclusion, "No ticket is stapled to this file, and it has no valid signature.");
+    const Report bare = inspect(path);
+    EXPECT_EQ(bare.outcome, Outcome::unreadable);
+    EXPECT_EQ(bare.conclusion, "No ticket is stapled to this file, and it has no valid signature.");
     writeFile(ticketFileOf(path), sealed(bundlePayload()));
     const Report report = inspect(path);
     EXPECT_FALSE(report.codeHash);
-    EXPECT_EQ(report.outcome, Outcome::refused);
+    EXPECT_EQ(report.outcome, Outcome::unreadable);
+    EXPECT_EQ(inspect::exitStatusOf(report.outcome), 66);
     EXPECT_EQ(report.fault->rule, "the artefact has no valid signature, so no ticket can list it");
+}
+
+TEST_F(Inspection, OfAnArtefactWithoutAValidSignatureEndsAsTheTool) {
+    BundleBuilder()
+        .executable(ExecutableImageBuilder().withoutSignature().build())
+        .write(platform.directory / "Bare.app");
+    for (const std::string& path :
+         {platform.directory / "Bare.app", write("Bare.pkg", std::string(1000, 'x'))}) {
+        const auto file = PWHashedFile::initWithFileURL(values::URL::fileURLWithPath(path), services());
+        EXPECT_FALSE(codeHashOf(*file)) << path;
+        EXPECT_EQ(inspect::exitStatusOf(inspect(path).outcome), 66) << path;
+    }
 }
 
 TEST_F(Inspection, OfSeveralSlicesShowsEachAndMarksTheMainOne) {
