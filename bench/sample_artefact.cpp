@@ -17,6 +17,7 @@
 #include <random>
 #include <string_view>
 
+#include "formats/executable_image.h"
 #include "lumora-local/ad_hoc_signature.h"
 #include "lumora-local/samples.h"
 #include "support/archive_builder.h"
@@ -71,9 +72,8 @@ void writeBundle(const std::string& bundle, int files, std::size_t size) {
     const std::string executable = contents + "Programs/Sample";
     pinwell::test::writeFile(contents + "Info.plist", list);
     pinwell::test::writeFile(contents + "_CodeSignature/CodeResources", components.resourceSeal);
-    pinwell::test::writeFile(
-        executable, pinwell::lumora::makeSignedImage(pinwell::lumora::kCpuTypeArm64, "com.example.benchmark",
-                                                     components));
+    pinwell::test::writeFile(executable, pinwell::lumora::makeSignedImage(
+                                             pinwell::kCpuType64Arm, "com.example.benchmark", components));
     std::filesystem::permissions(executable, std::filesystem::perms::owner_all);
 }
 

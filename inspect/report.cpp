@@ -70,9 +70,9 @@ std::string_view trailerTypeName(std::uint16_t type) {
 
 std::string cpuTypeName(std::uint32_t cpuType) {
     switch (cpuType) {
-        case codesign::kCpuType64Arm:
+        case kCpuType64Arm:
             return "64-bit ARM";
-        case codesign::kCpuType64X86:
+        case kCpuType64X86:
             return "64-bit x86";
         default:
             return values::format("CPU type 0x%08x", cpuType);

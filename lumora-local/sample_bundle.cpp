@@ -11,6 +11,7 @@
 #include <map>
 
 #include "base/byte_io.h"
+#include "formats/executable_image.h"
 #include "lumora-local/ad_hoc_signature.h"
 #include "lumora-local/file_writing.h"
 #include "lumora-local/samples.h"
@@ -33,18 +34,11 @@ constexpr std::string_view kApplicationReadMe = "A sample application, to try a 
 constexpr std::string_view kGreeting = "Hello.\n";
 
 // Executable image. The text segment is one alignment unit long; the signature follows it.
-constexpr std::uint32_t kImageMagic64 = 0xFEEDFACF;
-constexpr std::uint32_t kUniversalMagic = 0xCAFEBABE;
-constexpr std::uint32_t kFileTypeExecutable = 2;
 constexpr std::uint32_t kNoUndefinedSymbols = 1;
-constexpr std::uint32_t kCommandSegment64 = 0x19;
 constexpr std::uint32_t kCommandMain = 0x80000028;
-constexpr std::uint32_t kCommandCodeSignature = 0x1D;
-constexpr std::uint32_t kImageHeaderSize = 32;
 constexpr std::uint32_t kSegmentCommandSize = 72;
 constexpr std::uint32_t kSectionSize = 80;
 constexpr std::uint32_t kMainCommandSize = 24;
-constexpr std::uint32_t kSignatureCommandSize = 16;
 constexpr std::uint32_t kCommandsSize =
     2 * kSegmentCommandSize + kSectionSize + kMainCommandSize + kSignatureCommandSize;
 constexpr std::uint32_t kInstructions = 0x80000400;  // section flags: only code
@@ -55,7 +49,7 @@ constexpr std::uint64_t kLoadAddress = 0x100000000;
 /// "return 0" for each processor.
 Data program(std::uint32_t cpuType) {
     ByteWriter code;
-    if (cpuType == kCpuTypeArm64) {
+    if (cpuType == kCpuType64Arm) {
         code.le32(0x52800000).le32(0xD65F03C0);  // mov w0, #0; ret
     } else {
         code.be16(0x31C0).u8(0xC3);  // xor eax, eax; ret
@@ -76,7 +70,7 @@ struct Segment {
 };
 
 void appendSegment(ByteWriter& image, const Segment& segment) {
-    image.le32(kCommandSegment64).le32(kSegmentCommandSize + segment.sections * kSectionSize);
+    image.le32(kLoadCommandSegment64).le32(kSegmentCommandSize + segment.sections * kSectionSize);
     appendName(image, segment.name);
     image.le64(kLoadAddress + segment.offset)
         .le64(kAlignment)
@@ -91,14 +85,14 @@ void appendSegment(ByteWriter& image, const Segment& segment) {
 /// Header, commands and code: the bytes under the page hashes.
 Data textSegment(std::uint32_t cpuType, std::uint32_t signatureSize) {
     const Data code = program(cpuType);
-    const std::uint32_t codeOffset = kImageHeaderSize + kCommandsSize;
+    const std::uint32_t codeOffset = std::uint32_t{kImageHeaderSize64} + kCommandsSize;
     constexpr std::uint32_t kReadExecute = 5;
     constexpr std::uint32_t kRead = 1;
 
     ByteWriter image;
     image.le32(kImageMagic64)
         .le32(cpuType)
-        .le32(cpuType == kCpuTypeX86_64 ? 3 : 0)  // subtype: every processor of the type
+        .le32(cpuType == kCpuType64X86 ? 3 : 0)  // subtype: every processor of the type
         .le32(kFileTypeExecutable)
         .le32(4)
         .le32(kCommandsSize)
@@ -111,7 +105,7 @@ Data textSegment(std::uint32_t cpuType, std::uint32_t signatureSize) {
     image.le32(kInstructions).zeros(12);
     appendSegment(image, {"__LINKEDIT", kAlignment, signatureSize, kRead, 0});
     image.le32(kCommandMain).le32(kMainCommandSize).le64(codeOffset).le64(0);
-    image.le32(kCommandCodeSignature).le32(kSignatureCommandSize).le32(kAlignment).le32(signatureSize);
+    image.le32(kLoadCommandSignature).le32(kSignatureCommandSize).le32(kAlignment).le32(signatureSize);
     image.bytes(code).zeros(kAlignment - image.size());
     return std::move(image).take();
 }
@@ -155,10 +149,10 @@ Data makeSignedImage(std::uint32_t cpuType, const std::string& identifier,
 Data makeUniversalImage(const std::vector<std::pair<std::uint32_t, Data>>& slices) {
     ByteWriter header;
     ByteWriter contents;  // from the first slice on
-    header.be32(kUniversalMagic).be32(static_cast<std::uint32_t>(slices.size()));
+    header.be32(kUniversalMagic32).be32(static_cast<std::uint32_t>(slices.size()));
     for (const auto& [cpuType, slice] : slices) {
         header.be32(cpuType)
-            .be32(cpuType == kCpuTypeX86_64 ? 3 : 0)
+            .be32(cpuType == kCpuType64X86 ? 3 : 0)
             .be32(static_cast<std::uint32_t>(kAlignment + contents.size()))
             .be32(static_cast<std::uint32_t>(slice.size()))
             .be32(kAlignmentBits);
@@ -179,9 +173,9 @@ struct Program {
 };
 
 Program makeProgram(const std::string& identifier, const SealedComponents& components) {
-    SignedImage intel = signedImage(kCpuTypeX86_64, identifier, components);
-    SignedImage arm = signedImage(kCpuTypeArm64, identifier, components);
-    return {makeUniversalImage({{kCpuTypeX86_64, intel.bytes}, {kCpuTypeArm64, arm.bytes}}),
+    SignedImage intel = signedImage(kCpuType64X86, identifier, components);
+    SignedImage arm = signedImage(kCpuType64Arm, identifier, components);
+    return {makeUniversalImage({{kCpuType64X86, intel.bytes}, {kCpuType64Arm, arm.bytes}}),
             {arm.codeHash, intel.codeHash}};
 }
 

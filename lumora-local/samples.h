@@ -27,9 +27,6 @@ namespace pinwell::lumora {
 /// Failure.
 std::vector<std::string> writeSamples(const std::string& directory, values::Date now);
 
-inline constexpr std::uint32_t kCpuTypeArm64 = 0x0100000C;
-inline constexpr std::uint32_t kCpuTypeX86_64 = 0x01000007;
-
 /// The property list and the resource seal that a code directory covers.
 struct SealedComponents {
     base::Data informationPropertyList{};  // empty: it covers none

@@ -1,6 +1,6 @@
 // Reads the headers of an executable image for deep verification, besides the signature's place
-// (codesign/executable_image.h, whose layout tables apply here too). Finds the parts mapped as code and the
-// embedded property list. Checks that hashes cover every byte that they can cover.
+// (codesign/executable_image.h). formats/executable_image.h has the layout. Finds the parts mapped as code
+// and the embedded property list. Checks that hashes cover every byte that they can cover.
 #pragma once
 
 #include <cstdint>

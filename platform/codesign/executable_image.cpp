@@ -13,18 +13,6 @@ using base::ByteReader;
 
 namespace {
 
-constexpr std::uint32_t kMagic32 = 0xFEEDFACE;
-constexpr std::uint32_t kMagic64 = 0xFEEDFACF;
-constexpr std::uint32_t kUniversalMagic32 = 0xCAFEBABE;
-constexpr std::uint32_t kUniversalMagic64 = 0xCAFEBABF;
-constexpr std::size_t kUniversalHeaderSize = 8;
-constexpr std::size_t kSliceEntrySize32 = 20;
-constexpr std::size_t kSliceEntrySize64 = 32;
-constexpr std::size_t kThinHeaderSize32 = 28;
-constexpr std::size_t kThinHeaderSize64 = 32;
-constexpr std::uint32_t kLoadCommandHeaderSize = 8;
-constexpr std::uint32_t kSignatureCommandSize = 16;
-
 /// Bytes of a list read at once. Most lists of load commands fit.
 constexpr std::size_t kPieceSize = std::size_t{16} * 1024;
 
@@ -68,36 +56,6 @@ class PieceReader {
     std::size_t used_ = 0;  // of the piece
 };
 
-/// Reads 32-bit numbers in the order of one image.
-class OrderedReader {
-  public:
-    OrderedReader(ByteView bytes, bool bigEndian) : reader_(bytes), bigEndian_(bigEndian) {}
-
-    std::uint32_t u32(std::string_view what) { return bigEndian_ ? reader_.be32(what) : reader_.le32(what); }
-    void skip(std::uint64_t length, std::string_view what) { reader_.skip(length, what); }
-
-  private:
-    ByteReader reader_;
-    bool bigEndian_;
-};
-
-struct ThinMagic {
-    bool bigEndian;
-    bool is64;
-};
-
-std::optional<ThinMagic> thinMagic(ByteView start) {
-    const std::uint32_t big = ByteReader(start).be32("magic");
-    const std::uint32_t little = ByteReader(start).le32("magic");
-    if (big == kMagic32 || big == kMagic64) return ThinMagic{true, big == kMagic64};
-    if (little == kMagic32 || little == kMagic64) return ThinMagic{false, little == kMagic64};
-    return std::nullopt;
-}
-
-bool isUniversalMagic(std::uint32_t magic) {
-    return magic == kUniversalMagic32 || magic == kUniversalMagic64;
-}
-
 void requireInside(const FileRange& inner, std::uint64_t first, std::uint64_t size, const char* what) {
     const bool inside = inner.offset >= first && inner.offset <= size && inner.length <= size - inner.offset;
     if (!inside) refuse(std::string(what) + " lies outside its place");
@@ -124,29 +82,19 @@ void requireDistinct(const std::vector<ImageSlice>& slices) {
         refuse("two slices of one CPU type and subtype");
 }
 
-ImageSlice readSliceEntry(ByteReader entry, bool is64) {
-    ImageSlice slice;
-    slice.cpuType = entry.be32("CPU type");
-    slice.cpuSubtype = entry.be32("CPU subtype");
-    slice.range.offset = is64 ? entry.be64("slice offset") : entry.be32("slice offset");
-    slice.range.length = is64 ? entry.be64("slice size") : entry.be32("slice size");
-    return slice;
+ImageSlice readSlice(ByteView bytes, const UniversalHeader& header) {
+    const UniversalEntry entry = readUniversalEntry(bytes, header);
+    return {entry.cpuType, entry.cpuSubtype, {entry.offset, entry.length}};
 }
 
-std::vector<ImageSlice> readUniversal(const ByteSource& source) {
-    const Data start = source.read(0, kUniversalHeaderSize);
-    ByteReader header(start);
-    const bool is64 = header.be32("magic") == kUniversalMagic64;
-    const std::uint32_t count = header.be32("slice count");
-    if (count == 0) refuse("a universal image without slices");
-
-    const std::size_t entrySize = is64 ? kSliceEntrySize64 : kSliceEntrySize32;
-    const FileRange list = {kUniversalHeaderSize, std::uint64_t{count} * entrySize};
+std::vector<ImageSlice> readUniversal(const ByteSource& source, const UniversalHeader& header) {
+    if (header.sliceCount == 0) refuse("a universal image without slices");
+    const FileRange list = {kUniversalHeaderSize, header.listSize()};
     requireInside(list, 0, source.size(), "the list of slices");
     PieceReader entries(source, list);
     std::vector<ImageSlice> slices;
-    for (std::uint32_t i = 0; i < count; ++i) {
-        slices.push_back(readSliceEntry(ByteReader(entries.next(entrySize, "the list of slices")), is64));
+    for (std::uint32_t i = 0; i < header.sliceCount; ++i) {
+        slices.push_back(readSlice(entries.next(header.entrySize(), "the list of slices"), header));
         requireInside(slices.back().range, list.offset + list.length, source.size(), "a slice");
     }
     requireSeparate(slices);
@@ -155,11 +103,11 @@ std::vector<ImageSlice> readUniversal(const ByteSource& source) {
 }
 
 /// The signature that the load commands give, relative to the image.
-std::optional<FileRange> walkLoadCommands(PieceReader commands, bool bigEndian, std::uint32_t count) {
+std::optional<FileRange> walkLoadCommands(PieceReader commands, const ImageHeader& image) {
     std::optional<FileRange> found;
     // Every command takes at least eight bytes of a bounded space, so a false count ends the walk early.
-    for (std::uint32_t i = 0; i < count; ++i) {
-        OrderedReader header(commands.next(kLoadCommandHeaderSize, "a load command"), bigEndian);
+    for (std::uint32_t i = 0; i < image.commandCount; ++i) {
+        ImageReader header(commands.next(kLoadCommandHeaderSize, "a load command"), image.form);
         const std::uint32_t command = header.u32("load command");
         const std::uint32_t size = header.u32("load command size");
         if (size < kLoadCommandHeaderSize) refuse("a load command is shorter than its header");
@@ -169,7 +117,7 @@ std::optional<FileRange> walkLoadCommands(PieceReader commands, bool bigEndian, 
         }
         if (size != kSignatureCommandSize) refuse("the signature's load command has a wrong size");
         if (found) refuse("two load commands give a signature");
-        OrderedReader body(commands.next(size - kLoadCommandHeaderSize, "a load command"), bigEndian);
+        ImageReader body(commands.next(size - kLoadCommandHeaderSize, "a load command"), image.form);
         found.emplace();
         found->offset = body.u32("signature offset");
         found->length = body.u32("signature length");
@@ -182,20 +130,27 @@ std::optional<FileRange> walkLoadCommands(PieceReader commands, bool bigEndian, 
 bool isExecutableImage(const ByteSource& source) {
     if (source.size() < 4) return false;
     const Data start = source.read(0, 4);
-    return thinMagic(start).has_value() || isUniversalMagic(ByteReader(start).be32("magic"));
+    return imageFormOf(start) || isUniversalMagic(start);
 }
 
 std::vector<ImageSlice> readSlices(const ByteSource& source) {
-    const Data start = source.read(0, 8);
-    if (isUniversalMagic(ByteReader(start).be32("magic"))) return readUniversal(source);
-    const std::optional<ThinMagic> magic = thinMagic(start);
-    if (!magic) refuse("not an executable image");
-    OrderedReader reader(start, magic->bigEndian);
+    const Data start = source.read(0, kUniversalHeaderSize);
+    if (const auto universal = readUniversalHeader(start)) return readUniversal(source, *universal);
+    const std::optional<ImageForm> form = imageFormOf(start);
+    if (!form) refuse("not an executable image");
+    ImageReader reader(start, *form);
     reader.skip(4, "magic");
     ImageSlice whole;
     whole.cpuType = reader.u32("CPU type");
     whole.range.length = source.size();
     return {whole};
+}
+
+ImageHeader readSliceHeader(const ByteSource& source, const ImageSlice& slice) {
+    if (slice.range.length < kImageHeaderSize32) refuse("a slice is shorter than an image header");
+    const auto header = readImageHeader(source.read(slice.range.offset, kImageHeaderSize32));
+    if (!header) refuse("a slice is not an executable image");
+    return *header;
 }
 
 const ImageSlice& preferredSlice(const std::vector<ImageSlice>& slices) {
@@ -209,20 +164,12 @@ const ImageSlice& preferredSlice(const std::vector<ImageSlice>& slices) {
 }
 
 std::optional<FileRange> findImageSignature(const ByteSource& source, const ImageSlice& slice) {
-    if (slice.range.length < kThinHeaderSize32) refuse("a slice is shorter than an image header");
-    const Data start = source.read(slice.range.offset, kThinHeaderSize32);
-    const std::optional<ThinMagic> magic = thinMagic(start);
-    if (!magic) refuse("a slice is not an executable image");
-
-    OrderedReader header(start, magic->bigEndian);
-    header.skip(16, "magic, CPU and file type");
-    const std::uint32_t count = header.u32("count of load commands");
-    const std::uint32_t size = header.u32("size of load commands");
-    const FileRange commands = {magic->is64 ? kThinHeaderSize64 : kThinHeaderSize32, size};
+    const ImageHeader header = readSliceHeader(source, slice);
+    const FileRange commands = {header.form.headerSize(), header.commandsSize};
     requireInside(commands, 0, slice.range.length, "the list of load commands");
 
     std::optional<FileRange> signature = walkLoadCommands(
-        PieceReader(source, {slice.range.offset + commands.offset, size}), magic->bigEndian, count);
+        PieceReader(source, {slice.range.offset + commands.offset, commands.length}), header);
     if (!signature || signature->length == 0) return std::nullopt;
     requireInside(*signature, commands.offset + commands.length, slice.range.length, "the signature");
     signature->offset += slice.range.offset;

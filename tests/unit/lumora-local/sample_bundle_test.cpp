@@ -10,6 +10,7 @@
 #include "base/bytes.h"
 #include "base/text.h"
 #include "crypto/crypto.h"
+#include "formats/executable_image.h"
 #include "lumora-local/failure.h"
 #include "support/temporary_directory.h"
 #include "values/bundle.h"
@@ -125,20 +126,19 @@ TEST_P(SignedImage, MatchesItsCodeDirectory) {
     EXPECT_TRUE(reader.atEnd());
 }
 
-INSTANTIATE_TEST_SUITE_P(Processors, SignedImage, testing::Values(kCpuTypeArm64, kCpuTypeX86_64),
+INSTANTIATE_TEST_SUITE_P(Processors, SignedImage, testing::Values(kCpuType64Arm, kCpuType64X86),
                          [](const auto& processor) {
-                             return processor.param == kCpuTypeArm64 ? "Arm64" : "X86_64";
+                             return processor.param == kCpuType64Arm ? "Arm64" : "X86_64";
                          });
 
 TEST(UniversalImage, ListsItsSlicesAtAlignedPlaces) {
     const Data first(20'000, std::byte{1});
     const Data second(10, std::byte{2});
-    const Data image = makeUniversalImage({{kCpuTypeX86_64, first}, {kCpuTypeArm64, second}});
+    const Data image = makeUniversalImage({{kCpuType64X86, first}, {kCpuType64Arm, second}});
     ByteReader reader(image);
     EXPECT_EQ(reader.be32("magic"), 0xCAFEBABEU);
     EXPECT_EQ(reader.be32("count"), 2U);
-    for (const auto& [cpuType, slice] :
-         {std::pair(kCpuTypeX86_64, first), std::pair(kCpuTypeArm64, second)}) {
+    for (const auto& [cpuType, slice] : {std::pair(kCpuType64X86, first), std::pair(kCpuType64Arm, second)}) {
         EXPECT_EQ(reader.be32("processor"), cpuType);
         reader.skip(4, "subtype");
         const std::uint32_t offset = reader.be32("offset");
@@ -186,8 +186,8 @@ TEST(SampleApplication, OverwritesNothing) {
 }
 
 TEST(SampleApplication, IsReproducible) {
-    EXPECT_EQ(makeSignedImage(kCpuTypeArm64, "a", kComponents),
-              makeSignedImage(kCpuTypeArm64, "a", kComponents));
+    EXPECT_EQ(makeSignedImage(kCpuType64Arm, "a", kComponents),
+              makeSignedImage(kCpuType64Arm, "a", kComponents));
 }
 
 }  // namespace
