@@ -88,7 +88,7 @@ TEST_F(Lookup, IgnoresUserDefaultsOnAnOrdinaryBuild) {
                 StartsWith("/database/1/com.ostrel.tm.ticket-delivery/production/"));
 }
 
-TEST_F(Lookup, TakesContainerAndEnvironmentFromUserDefaultsOnAnInternalBuild) {
+TEST_F(Lookup, AsksForTheContainerAndEnvironmentOfUserDefaultsOnAnInternalBuild) {
     writeFile(directory / "platform/internal-security-policies", std::string_view());
     writeFile(directory / "home/config/com.ostrel.tm.pinwell.json",
               std::string_view(R"({"lm-container":"com.example.other","lm-production":false})"));
