@@ -35,7 +35,8 @@ endfunction()
 # Every test in it is a test of ctest. With WHOLE the program is one test: for tables of many quick rows.
 # PINWELL_WHOLE_TESTS does the same for a folder. SHARDS splits a whole program into this number of parts, which run
 # side by side.
-# SLOW gives its tests the label "slow": scripts/test leaves them out after an edit, and runs them for a release.
+# SLOW gives its tests the label "slow": scripts/test leaves them out after an edit, and runs them for a release. Without
+# PINWELL_SLOW_TESTS the program has no tests, and is built only by its name.
 # THREADS gives a whole program the label "threads", and adds it to the target "threaded_tests": the tested code uses
 # several threads, and ThreadSanitizer runs it.
 # VOLUMES is a --gtest_filter for the tests of a whole program that mount volumes. They are the test NAME.volumes, of the
@@ -75,6 +76,15 @@ function(pinwell_test name)
   target_compile_options(${name} PRIVATE ${pinwell_test_warnings})
   target_link_libraries(${name} PRIVATE pinwell_warnings pinwell_sanitizers test_support
                         GTest::gmock GTest::gtest_main)
+  # These programs only start the tested executables, and the sanitizers' code would double the time to compile them.
+  # ThreadSanitizer must see all code of a process, or it reports false races.
+  if(PINWELL_TEST_KIND STREQUAL e2e AND NOT PINWELL_SANITIZE MATCHES thread)
+    set_target_properties(${name} PROPERTIES PINWELL_UNSANITIZED ON)
+  endif()
+  if(test_SLOW AND NOT PINWELL_SLOW_TESTS)
+    set_target_properties(${name} PROPERTIES EXCLUDE_FROM_ALL ON)
+    return()
+  endif()
   set(environment PINWELL_TEST_KIND=${PINWELL_TEST_KIND})
   if(test_VOLUMES)
     add_test(NAME ${name}.volumes COMMAND ${name})
