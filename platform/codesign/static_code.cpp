@@ -75,7 +75,7 @@ FileCode::FileCode(CodeKind kind, std::string file, std::unique_ptr<ByteSource> 
     : kind_(kind),
       file_(std::move(file)),
       source_(std::move(source)),
-      trailer_(std::move(trailer)),
+      trailer_(trailer),
       signatureDirectory_(std::move(signatureDirectory)),
       places_(std::move(places)),
       anchor_(std::move(anchor)) {}
@@ -100,7 +100,7 @@ std::shared_ptr<FileCode> FileCode::atPath(const std::string& path, const CodeAc
         trailer.reset();
     }
     std::string signatureDirectory = bundle ? path + "/Contents/_CodeSignature" : std::string();
-    return std::shared_ptr<FileCode>(new FileCode(kind, *file, std::move(source), std::move(trailer),
+    return std::shared_ptr<FileCode>(new FileCode(kind, *file, std::move(source), trailer,
                                                   std::move(signatureDirectory), access.places,
                                                   *std::move(anchor)));
 }
