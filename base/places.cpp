@@ -194,6 +194,10 @@ Result<FileDescriptor> Place::open(int flags, mode_t mode) const {
     return descriptor;
 }
 
+Result<RegularFile> Place::openRegularFile(int flags, mode_t mode) const {
+    return base::openRegularFile(directory(), name, flags | O_NOFOLLOW, path, mode);
+}
+
 Result<FileDescriptor> Place::openParent() const {
     return Place{parent, ".", path}.open(O_RDONLY | O_DIRECTORY);
 }

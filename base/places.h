@@ -20,6 +20,7 @@
 #include <vector>
 
 #include "base/error.h"
+#include "base/file_io.h"
 #include "base/handle.h"
 
 namespace pinwell::base {
@@ -37,6 +38,9 @@ struct Place {
 
     /// The item itself, without following a link (ELOOP); close-on-exec. `flags` as for open(2).
     Result<FileDescriptor> open(int flags, mode_t mode = 0) const;
+
+    /// The item itself if it is a regular file, as openRegularFile() opens it; without following a link.
+    Result<RegularFile> openRegularFile(int flags, mode_t mode = 0) const;
 
     /// The item's directory, opened for reading.
     Result<FileDescriptor> openParent() const;

@@ -38,7 +38,7 @@ template <class Step, class Report>
 void attempt(Step&& step, Report&& report) {
     try {
         step();
-    } catch (const files::FileHandleError& failure) {
+    } catch (const base::ReadFailure& failure) {
         report(failure.what());
     }
 }
@@ -112,9 +112,9 @@ bool DiskImageSignature::refuse(std::uint64_t offset, const char* rule) {
 
 // A read error is only reported here: the zeros instead of the bytes fail the next check, with its own
 // message.
-bool readDiskImageTrailer(files::FileReader& file, const std::string& name, DiskImageSignature& into,
+bool readDiskImageTrailer(const base::ByteSource& file, const std::string& name, DiskImageSignature& into,
                           const Diagnostics& diagnostics) {
-    attempt([&] { into.fileSize = file.seekToEnd(); },
+    attempt([&] { into.fileSize = file.size(); },
             [&](const char* reason) {
                 diagnostics.note("Could not get file size of %@. This should not have happened. %@", name,
                                  reason);
@@ -124,14 +124,11 @@ bool readDiskImageTrailer(files::FileReader& file, const std::string& name, Disk
         return into.refuse(0, "the file is too small for a disk image's trailer");
     }
     const std::uint64_t trailerStart = into.fileSize - kUDIFHeaderSize;
-    attempt(
-        [&] {
-            file.seek(trailerStart);
-            into.trailer.assign(file.read(kUDIFHeaderSize));
-        },
-        [&](const char* reason) {
-            diagnostics.note("Could read UDIF header of %@. This should not have happened. %@", name, reason);
-        });
+    attempt([&] { into.trailer.assign(file.readUpTo(trailerStart, kUDIFHeaderSize)); },
+            [&](const char* reason) {
+                diagnostics.note("Could read UDIF header of %@. This should not have happened. %@", name,
+                                 reason);
+            });
     if (!into.trailer.hasMagic()) {
         diagnostics.note("Not a supported disk image format, %d", into.trailer.magicAsShown());
         return into.refuse(trailerStart, "the file does not end in a disk image's trailer");
@@ -146,7 +143,7 @@ bool readDiskImageTrailer(files::FileReader& file, const std::string& name, Disk
     return true;
 }
 
-bool readDiskImageSuperblob(files::FileReader& file, const std::string& name, DiskImageSignature& into,
+bool readDiskImageSuperblob(const base::ByteSource& file, const std::string& name, DiskImageSignature& into,
                             const Diagnostics& diagnostics) {
     diagnostics.note("Codesign offset 0x%llx length: %llu", into.csStart, into.csLength);
     const std::uint64_t trailerStart = into.fileSize - kUDIFHeaderSize;
@@ -163,15 +160,11 @@ bool readDiskImageSuperblob(files::FileReader& file, const std::string& name, Di
     }
     const bool canBeSaid = into.csLength <= std::numeric_limits<std::uint32_t>::max();
     const std::uint64_t wanted = canBeSaid ? into.csLength : kSuperblobHeaderSize;
-    attempt(
-        [&] {
-            file.seek(into.csStart);
-            into.superblob = files::readShared(file, wanted);
-        },
-        [&](const char* reason) {
-            diagnostics.note("Could read code signature header of %@. This should not have happened. %@",
-                             name, reason);
-        });
+    attempt([&] { into.superblob = file.readSharedUpTo(into.csStart, wanted); },
+            [&](const char* reason) {
+                diagnostics.note("Could read code signature header of %@. This should not have happened. %@",
+                                 name, reason);
+            });
     return into.superblob.size() == wanted || into.refuse(into.csStart, "the signature cannot be read");
 }
 

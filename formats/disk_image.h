@@ -38,8 +38,8 @@
 #include <optional>
 #include <string>
 
+#include "base/byte_source.h"
 #include "base/bytes.h"
-#include "files/file_reader.h"
 #include "formats/findings.h"
 #include "formats/superblob.h"
 
@@ -109,12 +109,12 @@ struct DiskImageSignature {
 // `fault`, and a diagnostic line. No step throws.
 
 /// Reads the trailer: the kind of the file, and the superblob's place. `name` is for the diagnostics.
-bool readDiskImageTrailer(files::FileReader& file, const std::string& name, DiskImageSignature& into,
+bool readDiskImageTrailer(const base::ByteSource& file, const std::string& name, DiskImageSignature& into,
                           const Diagnostics& diagnostics = {});
 
 /// Reads the whole superblob of a signed image. Holes and zeros take no memory. If it is too long for its own
 /// length field, only its header is read, and the superblob is refused.
-bool readDiskImageSuperblob(files::FileReader& file, const std::string& name, DiskImageSignature& into,
+bool readDiskImageSuperblob(const base::ByteSource& file, const std::string& name, DiskImageSignature& into,
                             const Diagnostics& diagnostics = {});
 
 /// Splits the superblob.

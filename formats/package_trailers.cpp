@@ -14,12 +14,12 @@ namespace pinwell {
 namespace {
 
 using base::ByteReader;
+using base::ByteSource;
 using base::ByteView;
 using base::Data;
+using base::ReadFailure;
 using base::SharedBytes;
 using base::SparseBuffer;
-using files::FileHandleError;
-using files::FileReader;
 
 constexpr std::string_view kTrailerMagic = "t8lr";
 
@@ -135,18 +135,17 @@ class TrailerWindow {
     /// Longest piece that is read through the window, in bytes.
     static constexpr std::uint64_t kSize = 64ULL * 1024;
 
-    explicit TrailerWindow(FileReader& file) : file_(file) {}
+    explicit TrailerWindow(const ByteSource& file) : file_(file) {}
 
     /// The `length` bytes at `offset`, at most kSize of them; fewer at the end of the file. Valid until the
-    /// next call. Throws FileHandleError.
+    /// next call. Throws ReadFailure.
     ByteView readAt(std::uint64_t offset, std::uint64_t length) {
         if (!has(offset, length)) {
             const std::uint64_t end = offset + length;
             bytes_.clear();  // a failed read leaves no window
             start_ = end - std::min(end, std::max(length, next_));
             next_ = std::min(next_ * 2, kSize);
-            file_.seek(start_);
-            bytes_ = file_.read(end - start_);
+            bytes_ = file_.readUpTo(start_, end - start_);
         }
         const ByteView window = bytes_;
         const auto from = static_cast<std::size_t>(std::min<std::uint64_t>(offset - start_, window.size()));
@@ -159,7 +158,7 @@ class TrailerWindow {
                length <= bytes_.size() - (offset - start_);
     }
 
-    FileReader& file_;
+    const ByteSource& file_;
     Data bytes_;
     std::uint64_t next_ = 1024;  // length of the next load
     std::uint64_t start_ = 0;    // of the bytes, in the file
@@ -209,7 +208,7 @@ class BackwardCollection {
 
 class Walk {
   public:
-    Walk(FileReader& file, const std::string& name, const TrailerVisitor& visit,
+    Walk(const ByteSource& file, const std::string& name, const TrailerVisitor& visit,
          const Diagnostics& diagnostics)
         : file_(file), window_(file), name_(name), visit_(visit), diagnostics_(diagnostics) {}
 
@@ -223,9 +222,9 @@ class Walk {
 
     bool readSize() {
         try {
-            found_.fileSize = file_.seekToEnd();
+            found_.fileSize = file_.size();
             return found_.fileSize > 0;
-        } catch (const FileHandleError& failure) {
+        } catch (const ReadFailure& failure) {
             diagnostics_.note("Could not get file size of %@. This should not have happened. %@", name_,
                               failure.what());
             refuse(0, "the file's size cannot be found out");
@@ -238,7 +237,7 @@ class Walk {
         bool isWhole = true;
         try {
             while (const auto next = step(position, isWhole)) position = *next;
-        } catch (const FileHandleError& failure) {
+        } catch (const ReadFailure& failure) {
             diagnostics_.note("Couldn't read existing package trailers of %@. %@.", name_, failure.what());
             refuse(position, "the trailers cannot be read");
             unknown_.clear();
@@ -291,8 +290,7 @@ class Walk {
 
     SharedBytes readAt(std::uint64_t start, std::uint64_t length) {
         if (length <= TrailerWindow::kSize) return base::toData(window_.readAt(start, length));
-        file_.seek(start);
-        return files::readShared(file_, length);
+        return file_.readSharedUpTo(start, length);
     }
 
     void collect(const trailer_header& record, std::uint64_t start, std::uint64_t total) {
@@ -311,14 +309,14 @@ class Walk {
             found_.ticket = base::toData(readAt(start, heldOfTicket(length)).view());
             found_.ticketStart = start;
             found_.ticketLength = length;
-        } catch (const FileHandleError& failure) {
+        } catch (const ReadFailure& failure) {
             diagnostics_.note("Couldn't read existing ticket of %@. %@.", name_, failure.what());
             refuse(start, "the ticket cannot be read");
             unknown_.clear();
         }
     }
 
-    FileReader& file_;
+    const ByteSource& file_;
     TrailerWindow window_;
     const std::string& name_;
     const TrailerVisitor& visit_;
@@ -329,10 +327,10 @@ class Walk {
 
 }  // namespace
 
-PackageTrailerSurvey surveyPackageTrailers(FileReader& file, const TrailerVisitor& visit) {
+PackageTrailerSurvey surveyPackageTrailers(const ByteSource& file, const TrailerVisitor& visit) {
     PackageTrailerSurvey survey;
     TrailerWindow window(file);
-    std::optional<std::uint64_t> position = file.seekToEnd();
+    std::optional<std::uint64_t> position = file.size();
     while (position && *position >= kTrailerSize) {
         const std::uint64_t recordOffset = *position - kTrailerSize;
         const auto trailer = surveyTrailer(window.readAt(recordOffset, kTrailerSize), recordOffset);
@@ -351,8 +349,8 @@ PackageTrailerSurvey surveyPackageTrailers(FileReader& file, const TrailerVisito
     return survey;
 }
 
-PackageTrailers walkPackageTrailers(FileReader& file, const std::string& name, const TrailerVisitor& visit,
-                                    const Diagnostics& diagnostics) {
+PackageTrailers walkPackageTrailers(const ByteSource& file, const std::string& name,
+                                    const TrailerVisitor& visit, const Diagnostics& diagnostics) {
     return Walk(file, name, visit, diagnostics).run();
 }
 

@@ -23,8 +23,8 @@
 #include <optional>
 #include <string>
 
+#include "base/byte_source.h"
 #include "base/bytes.h"
-#include "files/file_reader.h"
 #include "formats/findings.h"
 
 namespace pinwell {
@@ -104,8 +104,8 @@ struct PackageTrailerSurvey {
 };
 
 /// Walks from the end of the file to the terminator, or to bytes that do not look like a record. `visit` gets
-/// each trailer on the way. Throws files::FileHandleError.
-PackageTrailerSurvey surveyPackageTrailers(files::FileReader& file, const TrailerVisitor& visit);
+/// each trailer on the way. Throws base::ReadFailure.
+PackageTrailerSurvey surveyPackageTrailers(const base::ByteSource& file, const TrailerVisitor& visit);
 
 struct PackageTrailers {
     std::uint64_t fileSize = 0;
@@ -137,7 +137,7 @@ struct PackageTrailers {
 ///
 /// `name` is for the diagnostics. `visit`, if given, gets every valid record, the terminator's and the
 /// ticket's too. A read error becomes a fault; throws nothing itself.
-PackageTrailers walkPackageTrailers(files::FileReader& file, const std::string& name,
+PackageTrailers walkPackageTrailers(const base::ByteSource& file, const std::string& name,
                                     const TrailerVisitor& visit = {}, const Diagnostics& diagnostics = {});
 
 }  // namespace pinwell

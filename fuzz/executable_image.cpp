@@ -19,7 +19,7 @@ bool liesWithin(const FileRange& part, const FileRange& whole) {
            part.offset - whole.offset <= whole.length - part.length;
 }
 
-void examineSlice(const codesign::ByteSource& source, const codesign::ImageSlice& slice) {
+void examineSlice(const base::ByteSource& source, const codesign::ImageSlice& slice) {
     require(liesWithin(slice.range, {0, source.size()}), "a slice lies within the file");
     const auto range = codesign::findImageSignature(source, slice);
     if (!range) return;
@@ -33,7 +33,7 @@ void examineSlice(const codesign::ByteSource& source, const codesign::ImageSlice
 }  // namespace
 
 void examine(ByteView input) {
-    const codesign::MemorySource source(base::toData(input));
+    const base::MemorySource source(base::toData(input));
     try {
         const bool isImage = codesign::isExecutableImage(source);
         const auto slices = codesign::readSlices(source);
@@ -48,9 +48,11 @@ void examine(ByteView input) {
                 examineSlice(source, slice);
             } catch (const codesign::CodeError&) {
             } catch (const base::ShortRead&) {
+            } catch (const base::ReadFailure&) {
             }
         }
     } catch (const codesign::CodeError&) {
+    } catch (const base::ReadFailure&) {
     }
 }
 

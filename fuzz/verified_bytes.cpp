@@ -54,7 +54,7 @@ Verified verified(Data bytes, const Verification& verification) {
     static verify::Workers workers(1);
     Verified result;
     Section section;
-    result.code = verification(codesign::MemorySource(std::move(bytes)), workers, section);
+    result.code = verification(base::MemorySource(std::move(bytes)), workers, section);
     result.checks = verify::flattened(section);
     return result;
 }

@@ -4,7 +4,7 @@
 
 #include <functional>
 
-#include "codesign/byte_source.h"
+#include "base/byte_source.h"
 #include "target.h"
 #include "verify/check.h"
 #include "verify/code.h"
@@ -13,7 +13,7 @@
 namespace pinwell::fuzz {
 
 using Verification =
-    std::function<verify::VerifiedCode(const codesign::ByteSource&, verify::Workers&, verify::Section&)>;
+    std::function<verify::VerifiedCode(const base::ByteSource&, verify::Workers&, verify::Section&)>;
 
 /// Whether the signature covers all bytes outside it, so that every byte counts.
 enum class Coverage { whole, partial };

@@ -6,7 +6,7 @@ namespace pinwell::fuzz {
 void examine(ByteView input) {
     examineVerified(
         input,
-        [](const codesign::ByteSource& source, verify::Workers& workers, verify::Section& section) {
+        [](const base::ByteSource& source, verify::Workers& workers, verify::Section& section) {
             return verify::verifyExecutable(source, {}, "executable", workers, section);
         },
         Coverage::whole);

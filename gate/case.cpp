@@ -2,9 +2,9 @@
 
 #include <utility>
 
+#include "base/byte_source.h"
 #include "base/bytes.h"
 #include "base/places.h"
-#include "codesign/byte_source.h"
 #include "codesign/code_error.h"
 #include "gate/policy.h"
 #include "src/ticket_record.h"
@@ -131,10 +131,10 @@ void Case::verifyBytes() {
 // The verified file, unless somebody changes it meanwhile.
 void Case::digestFile() {
     try {
-        const codesign::FileSource file(base::Places(), absolutePath_);
+        const base::FileSource file = codesign::openCode(base::Places(), absolutePath_);
         result_.fileDigest = base::toData(verify::digestOf(crypto::Digest::sha256, file, {0, file.size()}));
-    } catch (const codesign::CodeError& error) {
-        unreadable(std::string("The file cannot be read: ") + error.what() + ".");
+    } catch (const std::runtime_error& failure) {
+        unreadable(std::string("The file cannot be read: ") + codesign::asCodeError(failure).what() + ".");
     }
 }
 

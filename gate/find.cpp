@@ -4,8 +4,8 @@
 #include <filesystem>
 #include <system_error>
 
+#include "base/byte_source.h"
 #include "base/places.h"
-#include "codesign/byte_source.h"
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
 #include "src/PWHashedFile/file_kind.h"
@@ -20,8 +20,10 @@ namespace fs = std::filesystem;
 
 bool beginsAsExecutable(const std::string& path) {
     try {
-        return codesign::isExecutableImage(codesign::FileSource(base::Places(), path));
+        return codesign::isExecutableImage(codesign::openCode(base::Places(), path));
     } catch (const codesign::CodeError&) {
+        return false;
+    } catch (const base::ReadFailure&) {
         return false;
     }
 }

@@ -63,8 +63,8 @@ TicketDirectory::Found TicketDirectory::find(const std::string& recordName) cons
         } else {
             found.ticket = file->read(0, static_cast<std::size_t>(file->size()));
         }
-    } catch (const CodeError& error) {
-        found.problem = error.what();
+    } catch (const std::runtime_error& failure) {
+        found.problem = codesign::asCodeError(failure).what();
     }
     return found;
 }

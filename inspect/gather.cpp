@@ -57,7 +57,7 @@ Trailer shown(const SurveyedTrailer& trailer) {
 }
 
 /// The trailers, past the first ticket and past damaged records.
-PackageTrailerSurvey gatherTrailers(files::FileReader& file, TrailerPlace& into) {
+PackageTrailerSurvey gatherTrailers(const base::ByteSource& file, TrailerPlace& into) {
     const PackageTrailerSurvey survey = surveyPackageTrailers(file, [&](const SurveyedTrailer& trailer) {
         ++into.trailerCount;
         if (into.trailers.size() < kMaximumTrailersKept) into.trailers.push_back(shown(trailer));
@@ -176,10 +176,10 @@ std::optional<TicketPlaceFault> Inspector::gatherPackage(const URL& url, Report&
             const PackageTrailerSurvey survey = gatherTrailers(**file, place);
             fault = placeFault(survey.fault);
             if (survey.ticketStart && survey.ticketLength > 0) {
-                (*file)->seek(*survey.ticketStart);
-                gatherHeldTicket(files::readShared(**file, survey.ticketLength), *survey.ticketStart, report);
+                gatherHeldTicket((*file)->readSharedUpTo(*survey.ticketStart, survey.ticketLength),
+                                 *survey.ticketStart, report);
             }
-        } catch (const files::FileHandleError& failure) {
+        } catch (const base::ReadFailure& failure) {
             fault = TicketPlaceFault{std::string("the package cannot be read: ") + failure.what(), {}};
         }
     } else {

@@ -4,9 +4,9 @@
 
 #include <utility>
 
+#include "base/byte_source.h"
 #include "base/bytes.h"
 #include "base/error.h"
-#include "files/file_reader.h"
 #include "formats/disk_image.h"
 #include "formats/package_trailers.h"
 #include "formats/satchel.h"
@@ -21,8 +21,8 @@ static_assert(TrailerType{kTicketTrailerType} == TrailerType::ticket);
 
 namespace {
 
-using files::FileReader;
-using Opened = base::Result<std::unique_ptr<FileReader>>;
+using base::ByteSource;
+using base::FileSource;
 
 /// The parsers' diagnostics, which name the file, are for the tool's verbose mode.
 constexpr const char* kNoName = "";
@@ -49,7 +49,7 @@ Slot slotOf(const BlobRecord& blob, std::uint64_t superblobOffset) {
             {superblobOffset + blob.offset, blob.length()}};
 }
 
-Result<DiskImage> diskImageIn(FileReader& file) {
+Result<DiskImage> diskImageIn(const ByteSource& file) {
     DiskImageSignature read;
     const bool isImage = readDiskImageTrailer(file, kNoName, read) &&
                          (!read.isSigned() ||
@@ -73,7 +73,7 @@ Result<DiskImage> diskImageIn(FileReader& file) {
     return image;
 }
 
-Result<FlatPackage> flatPackageIn(FileReader& file) {
+Result<FlatPackage> flatPackageIn(const ByteSource& file) {
     FlatPackage package;
     PackageTrailers read = walkPackageTrailers(file, kNoName, [&](const SurveyedTrailer& trailer) {
         // Without data the walk ends with a fault, and this value is not returned.
@@ -92,9 +92,9 @@ Result<FlatPackage> flatPackageIn(FileReader& file) {
 }
 
 template <class Read>
-auto readIn(const Opened& file, Read read) -> decltype(read(**file)) {
+auto readIn(const base::Result<FileSource>& file, Read read) -> decltype(read(*file)) {
     if (!file) return unreadable(file.error());
-    return read(**file);
+    return read(*file);
 }
 
 }  // namespace
@@ -137,19 +137,19 @@ std::optional<Entry> entryAt(const Payload& payload, std::uint64_t index) {
 }
 
 Result<DiskImage> readDiskImage(const std::string& path) {
-    return readIn(files::openReader(path), diskImageIn);
+    return readIn(FileSource::open(base::Places(), path), diskImageIn);
 }
 
 Result<DiskImage> readDiskImage(int descriptor) {
-    return readIn(files::readerOf(descriptor, kNoName), diskImageIn);
+    return readIn(FileSource::borrow(descriptor), diskImageIn);
 }
 
 Result<FlatPackage> readFlatPackage(const std::string& path) {
-    return readIn(files::openReader(path), flatPackageIn);
+    return readIn(FileSource::open(base::Places(), path), flatPackageIn);
 }
 
 Result<FlatPackage> readFlatPackage(int descriptor) {
-    return readIn(files::readerOf(descriptor, kNoName), flatPackageIn);
+    return readIn(FileSource::borrow(descriptor), flatPackageIn);
 }
 
 }  // namespace v1

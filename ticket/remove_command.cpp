@@ -38,7 +38,7 @@ bool RemovablePackage::_writeNewTicketDataFromURL(const std::optional<URL>& sour
                 setAppropriateExitCode(kExitOK);
                 return true;
             }
-        } catch (const files::FileHandleError& failure) {
+        } catch (const base::FileFailure& failure) {
             NoisyLog("Fatal error while deleting existing ticket to %@. %@.", target.path(), failure.what());
             return failedToWrite(std::nullopt, error);
         }
@@ -51,10 +51,9 @@ bool RemovablePackage::_writeNewTicketDataFromURL(const std::optional<URL>& sour
 bool RemovablePackage::cutTerminatorToo(files::FileHandle& file) const {
     if (dataToAppend() || ticketStart() < kTrailerSize) return false;
     const std::uint64_t terminator = ticketStart() - kTrailerSize;
-    file.seek(terminator);
     const Diagnostics diagnostics = noisyDiagnostics();
     trailer_header record;
-    if (!trailer_data_is_valid(file.read(kTrailerSize), &record, diagnostics) ||
+    if (!trailer_data_is_valid(file.readUpTo(terminator, kTrailerSize), &record, diagnostics) ||
         !trailer_is_terminator(record.firstWord(), record.length(), diagnostics))
         return false;
     file.truncate(terminator);

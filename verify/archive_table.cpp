@@ -14,7 +14,7 @@
 
 namespace pinwell::verify {
 
-using codesign::ByteSource;
+using base::ByteSource;
 using codesign::FileRange;
 using codesign::refuse;
 using values::format;

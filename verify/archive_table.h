@@ -21,7 +21,7 @@
 #include <string>
 #include <vector>
 
-#include "codesign/byte_source.h"
+#include "base/byte_source.h"
 #include "codesign/executable_image.h"
 #include "verify/page_digest.h"
 
@@ -98,6 +98,6 @@ struct Archive {
 
 /// Reads the archive at the start of `source`, which ends at `end`. Throws codesign::CodeError if header or
 /// table is refused.
-Archive readArchive(const codesign::ByteSource& source, std::uint64_t end);
+Archive readArchive(const base::ByteSource& source, std::uint64_t end);
 
 }  // namespace pinwell::verify

@@ -19,7 +19,7 @@
 namespace pinwell::verify {
 
 using base::ByteReader;
-using codesign::ByteSource;
+using base::ByteSource;
 using codesign::FileRange;
 using values::format;
 using values::Value;

@@ -42,7 +42,7 @@ inline constexpr std::size_t kMaximumBlocks = 16'384;
 
 /// Adds a check for each checksum. Memory: the property list, and one buffer for each thread. Throws
 /// codesign::CodeError if the bytes cannot be read.
-void checkBlockTables(const codesign::ByteSource& source, const codesign::DiskImageTrailer& trailer,
+void checkBlockTables(const base::ByteSource& source, const codesign::DiskImageTrailer& trailer,
                       Workers& workers, Section& section);
 
 }  // namespace pinwell::verify

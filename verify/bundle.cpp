@@ -88,7 +88,7 @@ auto readIfThere(const DirectoryRef& root, const std::string& path, Read read)
 
 std::optional<Data> componentAt(const DirectoryRef& root, const std::string& path) {
     if (path.empty()) return std::nullopt;
-    return readIfThere(root, path, [&](const codesign::ByteSource& file) {
+    return readIfThere(root, path, [&](const base::ByteSource& file) {
         if (file.size() > kMaximumComponent) codesign::refuse(path + " is too long");
         return file.read(0, static_cast<std::size_t>(file.size()));
     });
@@ -97,7 +97,7 @@ std::optional<Data> componentAt(const DirectoryRef& root, const std::string& pat
 /// A file of the separate form, of any length.
 std::optional<codesign::SharedBytes> signatureFileAt(const DirectoryRef& root, const std::string& name) {
     return readIfThere(root, kSignatureDirectory + "/" + name,
-                       [](const codesign::ByteSource& file) { return file.readShared(0, file.size()); });
+                       [](const base::ByteSource& file) { return file.readShared(0, file.size()); });
 }
 
 const Data* addressOf(const std::optional<Data>& data) {
@@ -105,7 +105,7 @@ const Data* addressOf(const std::optional<Data>& data) {
 }
 
 /// Verifies a bundle's executable that is not an executable image, with its signature in separate files.
-VerifiedCode verifySeparately(const codesign::ByteSource& executable, const BundleLayout& layout,
+VerifiedCode verifySeparately(const base::ByteSource& executable, const BundleLayout& layout,
                               const OutsideComponents& outside, const std::string& place, Workers& workers,
                               Section& section) {
     std::optional<codesign::SharedBytes> codeDirectory = signatureFileAt(layout.root, "CodeDirectory");
@@ -133,13 +133,14 @@ bool hasSignatureFiles(const std::string& path) {
 
 }  // namespace
 
-void checkExecuteBit(const OpenFile& file, const std::string& place, Section& section) {
+void checkExecuteBit(const base::FileSource& file, const std::string& place, Section& section) {
     if (file.hasExecuteBit()) return;
     try {
         if (codesign::isExecutableImage(file) && !isProgram(file)) return;
     } catch (const CodeError&) {
         // The image is damaged; its own checks report that.
     } catch (const base::ShortRead&) {
+    } catch (const base::ReadFailure&) {
     }
     section.fail(kBundleStructure, place, "a program that may be executed", "a file without an execute bit");
 }
@@ -175,7 +176,8 @@ VerifiedCode verifyBundleAt(const std::string& path, const std::string& place, W
         section.pass(kSeal, sealPlace,
                      format("a seal of version %d with %zu entries", seal.version(), seal.entries().size()));
         BundleWalk(layout, rootPlace, path, seal, isImage, state, section, code).run();
-    } catch (const CodeError& error) {
+    } catch (const std::runtime_error& failure) {
+        const CodeError error = codesign::asCodeError(failure);
         if (error.status() == codesign::kIOError) {
             section.cannotRead(kSeal, rootPlace, error.what());
         } else {

@@ -82,7 +82,7 @@ VerifiedCode verifyBundleAt(const std::string& path, const std::string& place, W
                             Section& section);
 
 /// Checks that a program has an execute permission: without it, the program does not start.
-void checkExecuteBit(const OpenFile& file, const std::string& place, Section& section);
+void checkExecuteBit(const base::FileSource& file, const std::string& place, Section& section);
 
 class BundleWalk {
   public:

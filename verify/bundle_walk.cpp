@@ -265,14 +265,8 @@ void BundleWalk::visitNested(const DirectoryRef& directory, const Entry& entry, 
             checkExecuteBit(*file, place, nested);
             code = verifyExecutable(*file, {}, place, state_.workers, nested);
         }
-    } catch (const CodeError& error) {
-        if (error.status() == codesign::kIOError) {
-            nested.cannotRead(kNestedCode, place, error.what());
-        } else {
-            nested.fail(kNestedCode, place, "signed code", error.what());
-        }
-    } catch (const base::ShortRead& error) {
-        nested.fail(kNestedCode, place, "signed code", error.what());
+    } catch (const std::runtime_error& failure) {
+        nested.failWith(failure, kNestedCode, place, "signed code");
     }
     bindNested(std::move(code), sealed, nested);
     section_.sections.push_back(std::move(nested));

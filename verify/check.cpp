@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <utility>
 
+#include "codesign/code_error.h"
 #include "values/format.h"
 
 namespace pinwell::verify {
@@ -42,6 +43,16 @@ void Section::skip(std::string_view name, std::string at, std::string why) {
 
 void Section::cannotRead(std::string_view name, std::string at, std::string why) {
     add({std::string(name), std::move(at), Outcome::unreadable, "bytes that can be read", std::move(why)});
+}
+
+void Section::failWith(const std::runtime_error& failure, std::string_view name, std::string at,
+                       std::string expected) {
+    const codesign::CodeError error = codesign::asCodeError(failure);
+    if (error.status() == codesign::kIOError) {
+        cannotRead(name, std::move(at), error.what());
+    } else {
+        fail(name, std::move(at), std::move(expected), error.what());
+    }
 }
 
 Outcome worstOutcome(const Section& section) {

@@ -5,6 +5,7 @@
 #pragma once
 
 #include <cstddef>
+#include <stdexcept>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -95,6 +96,11 @@ struct Section {
     void note(std::string_view name, std::string place, std::string expected, std::string found);
     void skip(std::string_view name, std::string place, std::string why);
     void cannotRead(std::string_view name, std::string place, std::string why);
+
+    /// fail(), or cannotRead() if the bytes cannot be read, with the reason of `failure`, which is being
+    /// handled (codesign::asCodeError).
+    void failWith(const std::runtime_error& failure, std::string_view name, std::string place,
+                  std::string expected);
 };
 
 /// The gravest outcome in a section and its subsections; passed if there are no checks.

@@ -7,8 +7,8 @@
 #include <string>
 #include <vector>
 
+#include "base/byte_source.h"
 #include "base/bytes.h"
-#include "codesign/byte_source.h"
 #include "verify/check.h"
 #include "verify/signature_parts.h"
 #include "verify/workers.h"
@@ -39,7 +39,7 @@ struct VerifiedCode {
 /// Verifies an executable image: every slice, every code directory, every page. `outside`: files that the
 /// special slots of a bundle's main executable cover. An image outside a bundle has its embedded property
 /// list.
-VerifiedCode verifyExecutable(const codesign::ByteSource& source, const OutsideComponents& outside,
+VerifiedCode verifyExecutable(const base::ByteSource& source, const OutsideComponents& outside,
                               const std::string& place, Workers& workers, Section& section);
 
 /// Verifies a bundle with all that is in it (bundle.h). Throws codesign::CodeError if the directory has no
@@ -49,10 +49,10 @@ VerifiedCode verifyBundle(const std::string& path, Workers& workers, Section& se
 /// Verifies a disk image: its data, its trailer, and its block table as a second check. `source` ends in a
 /// disk image's trailer. An unsigned image has no identity here: its synthetic hash covers all of its data,
 /// so that hash is the whole check.
-VerifiedCode verifyDiskImage(const codesign::ByteSource& source, Workers& workers, Section& section);
+VerifiedCode verifyDiskImage(const base::ByteSource& source, Workers& workers, Section& section);
 
 /// Verifies a flat package: table of contents, signature, and everything in the heap.
-VerifiedCode verifyPackage(const codesign::ByteSource& source, Workers& workers, Section& section);
+VerifiedCode verifyPackage(const base::ByteSource& source, Workers& workers, Section& section);
 
 /// The identity that `parts` state.
 CodeIdentity identityOf(const SignatureParts& parts, std::string place);

@@ -80,28 +80,6 @@ bool staysBelow(const std::vector<std::string>& pending) {
 
 }  // namespace
 
-OpenFile::OpenFile(base::RegularFile file)
-    : file_(std::move(file.descriptor)),
-      size_(static_cast<std::uint64_t>(file.status.st_size)),
-      hasExecuteBit_((file.status.st_mode & (S_IXUSR | S_IXGRP | S_IXOTH)) != 0) {}
-
-void OpenFile::expectSequentialReads() const {
-    posix_fadvise(file_.get(), 0, 0, POSIX_FADV_SEQUENTIAL);
-}
-
-std::size_t OpenFile::readAt(std::uint64_t offset, std::span<std::byte> buffer) const {
-    std::size_t done = 0;
-    while (done < buffer.size()) {
-        const ssize_t count =
-            pread(file_.get(), buffer.data() + done, buffer.size() - done, static_cast<off_t>(offset + done));
-        if (count < 0 && errno == EINTR) continue;
-        if (count < 0) fail(errno, "the file");
-        if (count == 0) break;
-        done += static_cast<std::size_t>(count);
-    }
-    return done;
-}
-
 DirectoryRef OpenDirectory::atPath(const std::string& path) {
     FileDescriptor opened(open(path.c_str(), O_RDONLY | O_NOFOLLOW | O_DIRECTORY | O_CLOEXEC));
     if (!opened) fail(errno, path);
@@ -155,10 +133,10 @@ DirectoryRef OpenDirectory::directory(const std::string& name) const {
     }
 }
 
-std::unique_ptr<OpenFile> OpenDirectory::file(const std::string& name) const {
+std::unique_ptr<base::FileSource> OpenDirectory::file(const std::string& name) const {
     requireName(name);
     auto opened = base::openRegularFile(directory_.get(), name, O_RDONLY | O_NOFOLLOW, name);
-    if (opened) return std::make_unique<OpenFile>(*std::move(opened));
+    if (opened) return std::make_unique<base::FileSource>(*std::move(opened), "the file");
     const auto reason = static_cast<int>(opened.error().code());
     if (reason == EISDIR || reason == EINVAL)
         throw CodeError(codesign::kStaticCodeNotFound, "not a regular file");
@@ -173,7 +151,7 @@ std::string OpenDirectory::linkTarget(const std::string& name) const {
     return {target.data(), static_cast<std::size_t>(length)};
 }
 
-std::unique_ptr<OpenFile> OpenDirectory::fileAt(std::string_view relativePath) const {
+std::unique_ptr<base::FileSource> OpenDirectory::fileAt(std::string_view relativePath) const {
     const auto [parents, name] = splitLast(relativePath);
     if (parents.empty()) return file(std::string(name));
     return directoryAt(parents)->file(std::string(name));

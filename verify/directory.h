@@ -11,9 +11,8 @@
 #include <string_view>
 #include <vector>
 
-#include "base/file_io.h"
+#include "base/byte_source.h"
 #include "base/handle.h"
-#include "codesign/byte_source.h"
 
 namespace pinwell::verify {
 
@@ -22,26 +21,6 @@ enum class EntryKind { file, directory, link, other };
 struct Entry {
     std::string name;
     EntryKind kind = EntryKind::other;
-};
-
-/// The bytes of an open regular file, with the size it had when it was opened.
-class OpenFile final : public codesign::ByteSource {
-  public:
-    explicit OpenFile(base::RegularFile file);
-
-    std::uint64_t size() const override { return size_; }
-
-    /// Whether anybody may execute it.
-    bool hasExecuteBit() const noexcept { return hasExecuteBit_; }
-
-    void expectSequentialReads() const override;
-
-  private:
-    std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const override;
-
-    base::FileDescriptor file_;
-    std::uint64_t size_;
-    bool hasExecuteBit_;
 };
 
 /// Immutable; may be used from any number of threads. Every method throws codesign::CodeError: kIOError if
@@ -59,11 +38,11 @@ class OpenDirectory {
 
     std::optional<EntryKind> kindOf(const std::string& name) const;
     DirectoryRef directory(const std::string& name) const;
-    std::unique_ptr<OpenFile> file(const std::string& name) const;
+    std::unique_ptr<base::FileSource> file(const std::string& name) const;
     std::string linkTarget(const std::string& name) const;
 
     /// The same by a path of names with slashes between; each name except the last is a directory.
-    std::unique_ptr<OpenFile> fileAt(std::string_view relativePath) const;
+    std::unique_ptr<base::FileSource> fileAt(std::string_view relativePath) const;
     DirectoryRef directoryAt(std::string_view relativePath) const;
 
   private:

@@ -14,8 +14,7 @@
 
 namespace pinwell::verify {
 
-using codesign::ByteSource;
-using codesign::CodeError;
+using base::ByteSource;
 using codesign::DiskImageTrailer;
 using codesign::FileRange;
 using values::format;
@@ -87,14 +86,8 @@ VerifiedCode verified(const ByteSource& source, Workers& workers, Section& secti
 VerifiedCode verifyDiskImage(const ByteSource& source, Workers& workers, Section& section) {
     try {
         return verified(source, workers, section);
-    } catch (const CodeError& error) {
-        if (error.status() == codesign::kIOError) {
-            section.cannotRead(kSignature, kImagePlace, error.what());
-        } else {
-            section.fail(kSignature, kImagePlace, "a well-formed signature", error.what());
-        }
-    } catch (const base::ShortRead& error) {
-        section.fail(kSignature, kImagePlace, "a well-formed signature", error.what());
+    } catch (const std::runtime_error& failure) {
+        section.failWith(failure, kSignature, kImagePlace, "a well-formed signature");
     }
     return {.isSigned = true, .identities = {}};
 }

@@ -17,8 +17,7 @@
 
 namespace pinwell::verify {
 
-using codesign::ByteSource;
-using codesign::CodeError;
+using base::ByteSource;
 using codesign::FileRange;
 using codesign::ImageSlice;
 using values::format;
@@ -85,10 +84,8 @@ class ImageCheck {
             notePadding({area->offset + superblob.size(), area->length - superblob.size()}, at);
             checkContents(slice, *area, *parts, at);
             return {true, identityOf(*parts, at)};
-        } catch (const CodeError& error) {
-            reportBroken(at, error);
-        } catch (const base::ShortRead& error) {
-            section_.fail(kSignature, at, "a well-formed signature", error.what());
+        } catch (const std::runtime_error& failure) {
+            section_.failWith(failure, kSignature, at, "a well-formed signature");
         }
         return {true, std::nullopt};
     }
@@ -100,14 +97,6 @@ class ImageCheck {
                       format("%@, after the superblob (bytes %llu to %llu)", at, padding.offset,
                              padding.offset + padding.length - 1),
                       "padding of zeros", format("%llu bytes that nothing covers", padding.length));
-    }
-
-    void reportBroken(const std::string& at, const CodeError& error) {
-        if (error.status() == codesign::kIOError) {
-            section_.cannotRead(kSignature, at, error.what());
-        } else {
-            section_.fail(kSignature, at, "a well-formed signature", error.what());
-        }
     }
 
     void checkContents(const ImageSlice& slice, const FileRange& area, const SignatureParts& parts,
@@ -155,15 +144,9 @@ VerifiedCode verifyExecutable(const ByteSource& source, const OutsideComponents&
                               const std::string& place, Workers& workers, Section& section) {
     try {
         return ImageCheck(source, outside, place, workers, section).run();
-    } catch (const CodeError& error) {
+    } catch (const std::runtime_error& failure) {
         // The headers are broken, so the signed part cannot be found.
-        if (error.status() == codesign::kIOError) {
-            section.cannotRead(kImageStructure, place, error.what());
-        } else {
-            section.fail(kImageStructure, place, "a well-formed executable image", error.what());
-        }
-    } catch (const base::ShortRead& error) {
-        section.fail(kImageStructure, place, "a well-formed executable image", error.what());
+        section.failWith(failure, kImageStructure, place, "a well-formed executable image");
     }
     return {.isSigned = true, .identities = {}};
 }

@@ -13,7 +13,7 @@
 
 namespace pinwell::verify {
 
-using codesign::ByteSource;
+using base::ByteSource;
 using codesign::FileRange;
 
 /// A segment command (0x1 or 0x19) of a thin image. Ranges count from the slice's start.
@@ -31,7 +31,7 @@ struct ImageLayout {
     std::optional<FileRange> propertyList;  // section __info_plist of segment __TEXT
 };
 
-/// Throws codesign::CodeError or base::ShortRead.
+/// Throws codesign::CodeError, base::ShortRead or base::ReadFailure.
 ImageLayout readImageLayout(const ByteSource& source, const codesign::ImageSlice& slice);
 
 /// Checks that a universal image's list of slices agrees with the slices, that its gaps are zero, and that

@@ -20,7 +20,7 @@
 
 namespace pinwell::verify {
 
-using codesign::ByteSource;
+using base::ByteSource;
 using codesign::CodeError;
 using codesign::FileRange;
 using codesign::refuse;
@@ -40,31 +40,6 @@ std::optional<FileRange> inFile(const Archive& archive, const FileRange& range, 
     return FileRange{archive.heapStart + range.offset, range.length};
 }
 
-/// A source, as a file for the walk along the trailers.
-class SourceReader final : public files::FileReader {
-  public:
-    explicit SourceReader(const ByteSource& source) : source_(source) {}
-
-    std::uint64_t seekToEnd() override { return position_ = source_.size(); }
-    std::uint64_t seek(std::uint64_t position) override { return position_ = position; }
-    std::uint64_t position() override { return position_; }
-    Data read(std::uint64_t length) override {
-        const std::uint64_t rest = source_.size() - std::min(position_, source_.size());
-        const auto count = static_cast<std::size_t>(std::min(length, rest));
-        try {
-            Data bytes = source_.read(position_, count);
-            position_ += count;
-            return bytes;
-        } catch (const CodeError& error) {
-            throw files::FileHandleError(error.what());
-        }
-    }
-
-  private:
-    const ByteSource& source_;
-    std::uint64_t position_ = 0;
-};
-
 /// Checks the bytes after the archive (formats/package_trailers.h): none, or a terminator and one
 /// ticket.
 ///
@@ -77,12 +52,11 @@ class TrailerCheck {
 
     /// The end of the archive, where the trailers begin.
     std::uint64_t run() {
-        SourceReader reader(source_);
         try {
             const PackageTrailerSurvey survey =
-                surveyPackageTrailers(reader, [&](const SurveyedTrailer& trailer) { visit(trailer); });
+                surveyPackageTrailers(source_, [&](const SurveyedTrailer& trailer) { visit(trailer); });
             hasTerminator_ = survey.hasTerminator && !isBroken_;
-        } catch (const files::FileHandleError&) {
+        } catch (const base::ReadFailure&) {
             if (!isBroken_) fail(end_, kChain, "the trailers cannot be read");
         }
         if (end_ != source_.size() && !hasTerminator_)
@@ -307,8 +281,8 @@ class PackageCheck {
                 std::equal(found.begin(), found.end(), data.checksum.begin(), data.checksum.end());
             if (isSame) return std::nullopt;
             return Fault{&data, Outcome::failed, base::toHex(found)};
-        } catch (const CodeError& error) {
-            return Fault{&data, Outcome::unreadable, error.what()};
+        } catch (const std::runtime_error& failure) {
+            return Fault{&data, Outcome::unreadable, codesign::asCodeError(failure).what()};
         }
     }
 
@@ -380,14 +354,8 @@ class PackageCheck {
 VerifiedCode verifyPackage(const ByteSource& source, Workers& workers, Section& section) {
     try {
         return PackageCheck(source, workers, section).run();
-    } catch (const CodeError& error) {
-        if (error.status() == codesign::kIOError) {
-            section.cannotRead(kArchive, "archive", error.what());
-        } else {
-            section.fail(kArchive, "archive", "a well-formed archive", error.what());
-        }
-    } catch (const base::ShortRead& error) {
-        section.fail(kArchive, "archive", "a well-formed archive", error.what());
+    } catch (const std::runtime_error& failure) {
+        section.failWith(failure, kArchive, "archive", "a well-formed archive");
     }
     return {.isSigned = beginsAsArchive(source), .identities = {}};
 }

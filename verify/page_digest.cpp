@@ -10,7 +10,7 @@ std::span<std::byte> threadBuffer() {
     return {buffer.get(), kBufferSize};
 }
 
-bool readPieces(const codesign::ByteSource& source, const codesign::FileRange& range,
+bool readPieces(const base::ByteSource& source, const codesign::FileRange& range,
                 const std::function<bool(ByteView)>& take) {
     for (std::uint64_t done = 0; done < range.length;) {
         const auto length =
@@ -23,7 +23,7 @@ bool readPieces(const codesign::ByteSource& source, const codesign::FileRange& r
     return true;
 }
 
-ByteView digestOf(crypto::Digest algorithm, const codesign::ByteSource& source,
+ByteView digestOf(crypto::Digest algorithm, const base::ByteSource& source,
                   const codesign::FileRange& range) {
     crypto::Hasher& digest = crypto::threadHasher(algorithm);
     digest.begin();
@@ -34,7 +34,7 @@ ByteView digestOf(crypto::Digest algorithm, const codesign::ByteSource& source,
     return digest.finish();
 }
 
-bool isZero(const codesign::ByteSource& source, const codesign::FileRange& range) {
+bool isZero(const base::ByteSource& source, const codesign::FileRange& range) {
     return readPieces(source, range, [](ByteView piece) {
         return std::all_of(piece.begin(), piece.end(), [](std::byte byte) { return byte == std::byte{0}; });
     });

@@ -5,8 +5,8 @@
 #include <functional>
 #include <span>
 
+#include "base/byte_source.h"
 #include "base/bytes.h"
-#include "codesign/byte_source.h"
 #include "codesign/executable_image.h"
 #include "crypto/crypto.h"
 
@@ -20,16 +20,15 @@ inline constexpr std::size_t kBufferSize = std::size_t{512} * 1024;
 std::span<std::byte> threadBuffer();
 
 /// Reads a range of a source piece by piece into the thread's buffer, until `take` returns false. Returns
-/// false then. Throws codesign::CodeError.
-bool readPieces(const codesign::ByteSource& source, const codesign::FileRange& range,
+/// false then. Throws base::ReadFailure.
+bool readPieces(const base::ByteSource& source, const codesign::FileRange& range,
                 const std::function<bool(ByteView)>& take);
 
 /// The digest of a range of a source, with the thread's hasher and buffer; valid until that hasher is used
-/// again. Throws codesign::CodeError.
-ByteView digestOf(crypto::Digest algorithm, const codesign::ByteSource& source,
-                  const codesign::FileRange& range);
+/// again. Throws base::ReadFailure.
+ByteView digestOf(crypto::Digest algorithm, const base::ByteSource& source, const codesign::FileRange& range);
 
-/// Whether a range of a source is all zero. Uses the thread's buffer. Throws codesign::CodeError.
-bool isZero(const codesign::ByteSource& source, const codesign::FileRange& range);
+/// Whether a range of a source is all zero. Uses the thread's buffer. Throws base::ReadFailure.
+bool isZero(const base::ByteSource& source, const codesign::FileRange& range);
 
 }  // namespace pinwell::verify

@@ -13,7 +13,7 @@
 
 namespace pinwell::verify {
 
-using codesign::ByteSource;
+using base::ByteSource;
 using codesign::FileRange;
 using values::format;
 
@@ -177,8 +177,8 @@ void checkPageHashes(const ByteSource& source, const FileRange& code, const Sign
     try {
         if (!small.empty()) check.checkSmallPages(small, workers);
         for (const Directory* directory : large) check.checkLargePages(*directory, workers);
-    } catch (const codesign::CodeError& error) {
-        section.cannotRead(kPageHashes, place, error.what());
+    } catch (const std::runtime_error& failure) {
+        section.cannotRead(kPageHashes, place, codesign::asCodeError(failure).what());
         return;
     }
     small.insert(small.end(), large.begin(), large.end());

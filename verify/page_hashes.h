@@ -4,7 +4,7 @@
 
 #include <string>
 
-#include "codesign/byte_source.h"
+#include "base/byte_source.h"
 #include "codesign/executable_image.h"
 #include "verify/signature_parts.h"
 #include "verify/workers.h"
@@ -17,7 +17,7 @@ namespace pinwell::verify {
 ///
 /// Call checkCodeLimit first: every directory's limit must be the length of `code`. A directory with another
 /// limit is skipped.
-void checkPageHashes(const codesign::ByteSource& source, const codesign::FileRange& code,
+void checkPageHashes(const base::ByteSource& source, const codesign::FileRange& code,
                      const SignatureParts& parts, const std::string& place, Workers& workers,
                      Section& section);
 

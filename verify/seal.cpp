@@ -218,7 +218,8 @@ void SealedFiles::hashOne(const Job& job) {
         const bool isSame =
             std::equal(found.begin(), found.end(), job.entry->digest.begin(), job.entry->digest.end());
         if (!isSame) report(Outcome::failed, job, base::toHex(found));
-    } catch (const CodeError& error) {
+    } catch (const std::runtime_error& failure) {
+        const CodeError error = codesign::asCodeError(failure);
         report(error.status() == codesign::kIOError ? Outcome::unreadable : Outcome::failed, job,
                error.what());
     }

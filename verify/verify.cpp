@@ -3,10 +3,9 @@
 #include <optional>
 #include <utility>
 
-#include "base/byte_io.h"
+#include "base/byte_source.h"
 #include "base/error.h"
 #include "base/places.h"
-#include "codesign/byte_source.h"
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
@@ -24,8 +23,10 @@ std::string reasonOf(const base::Error& error) {
 
 bool isExecutableImage(const std::string& path) {
     try {
-        return codesign::isExecutableImage(codesign::FileSource(base::Places(), path));
+        return codesign::isExecutableImage(codesign::openCode(base::Places(), path));
     } catch (const codesign::CodeError&) {
+        return false;
+    } catch (const base::ReadFailure&) {
         return false;
     }
 }
@@ -48,14 +49,14 @@ VerifiedCode verified(const Subject& subject, Workers& workers, Section& root) {
         case Kind::bundle:
             return verifyBundle(subject.path, workers, root);
         case Kind::executable:
-            return verifyExecutable(codesign::FileSource(base::Places(), subject.path), {}, "executable",
+            return verifyExecutable(codesign::openCode(base::Places(), subject.path), {}, "executable",
                                     workers, root);
         case Kind::diskImage:
-            return verifyDiskImage(codesign::FileSource(base::Places(), subject.path), workers, root);
+            return verifyDiskImage(codesign::openCode(base::Places(), subject.path), workers, root);
         case Kind::package:
             break;
     }
-    return verifyPackage(codesign::FileSource(base::Places(), subject.path), workers, root);
+    return verifyPackage(codesign::openCode(base::Places(), subject.path), workers, root);
 }
 
 }  // namespace
@@ -95,16 +96,14 @@ Report verifyArtefact(const Subject& subject, Workers& workers) {
     Report report;
     try {
         report.code = verified(subject, workers, report.root);
-    } catch (const codesign::CodeError& error) {
+    } catch (const std::runtime_error& failure) {
+        const codesign::CodeError error = codesign::asCodeError(failure);
         if (error.status() == codesign::kInvalidSignature) {
             report.code.isSigned = true;
             report.root.fail(kSignature, {}, "a well-formed signature", error.what());
         } else {
             report.root.cannotRead(kArtefact, {}, error.what());
         }
-    } catch (const base::ShortRead& error) {
-        report.code.isSigned = true;
-        report.root.fail(kSignature, {}, "a well-formed signature", error.what());
     }
     return report;
 }

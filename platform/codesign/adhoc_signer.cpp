@@ -3,7 +3,6 @@
 #include <limits>
 
 #include "base/byte_io.h"
-#include "codesign/byte_source.h"
 #include "codesign/code_directory.h"
 #include "codesign/superblob.h"
 
@@ -26,7 +25,7 @@ Data emptyRequirements() {
 
 Data digestOfContent(const ByteSource& source, std::uint64_t limit) {
     crypto::Hasher hasher(crypto::Digest::sha256);
-    ReadAhead content(source, limit);
+    base::ReadAhead content(source, limit);
     for (ByteView piece = content.next(); !piece.empty(); piece = content.next()) hasher.update(piece);
     return base::toData(hasher.finish());
 }

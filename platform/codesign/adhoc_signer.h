@@ -26,7 +26,7 @@
 #include <optional>
 #include <string_view>
 
-#include "codesign/byte_source.h"
+#include "base/byte_source.h"
 #include "codesign/static_code.h"
 
 namespace pinwell::codesign {
@@ -43,7 +43,7 @@ struct OpaqueSignature {
 Data layOutOpaqueCodeDirectory(const OpaqueSignature& signature);
 
 /// A detached signature of `source`, a disk image if it has a trailer. Reads it in pieces of a fixed size.
-/// Throws CodeError if it cannot be read.
+/// Throws base::ReadFailure.
 Data signOpaque(const ByteSource& source, const std::optional<DiskImageTrailer>& trailer,
                 std::string_view identifier);
 

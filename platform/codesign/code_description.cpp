@@ -21,10 +21,9 @@ template <class Body, class Failed>
 void guarded(Body body, Failed failed) {
     try {
         body();
-    } catch (const CodeError& error) {
+    } catch (const std::runtime_error& failure) {
+        const CodeError error = asCodeError(failure);
         failed(error.status(), error.what());
-    } catch (const base::ShortRead& error) {
-        failed(kInvalidSignature, error.what());
     }
 }
 

@@ -1,10 +1,13 @@
-// The only failure type inside this folder. The service's methods turn it into a status, and let no exception
-// out.
+// The failures inside this folder, and the statuses that they mean. The service's methods turn them into a
+// status, and let no exception out.
 #pragma once
 
+#include <cstdint>
 #include <stdexcept>
 #include <string>
 
+#include "base/byte_source.h"
+#include "base/places.h"
 #include "codesign/code_signing.h"
 
 namespace pinwell::codesign {
@@ -24,5 +27,18 @@ class CodeError : public std::runtime_error {
 [[noreturn]] inline void refuse(const std::string& reason) {
     throw CodeError(kInvalidSignature, reason);
 }
+
+/// What `failure` means for code; call it only while `failure` is being handled. A CodeError is returned as
+/// it is. A read past the end (base::ReadFailure) and a base::ShortRead mean kInvalidSignature, every other
+/// failed read kIOError. All other exceptions are rethrown.
+CodeError asCodeError(const std::runtime_error& failure);
+
+/// The service's status for a file that cannot be found or opened, by the errno value.
+Status statusOfLookup(std::int64_t reason);
+
+/// The regular file at `path`, kept open. Never follows a link in the last component and never blocks on a
+/// pipe or device. Throws CodeError: kStaticCodeNotFound if there is no regular file, kIOError if it cannot
+/// be opened.
+base::FileSource openCode(const base::Places& places, const std::string& path);
 
 }  // namespace pinwell::codesign

@@ -14,10 +14,15 @@
 #include <optional>
 #include <vector>
 
-#include "codesign/byte_source.h"
+#include "base/byte_source.h"
 #include "formats/executable_image.h"
 
 namespace pinwell::codesign {
+
+using base::ByteSource;
+using base::ByteView;
+using base::Data;
+using base::SharedBytes;
 
 /// A part of a file.
 struct FileRange {
@@ -34,21 +39,23 @@ struct ImageSlice {
     FileRange range;
 };
 
-/// Whether the file begins like an executable image. Throws CodeError only if it cannot be read.
+/// Whether the file begins like an executable image. Throws base::ReadFailure.
 bool isExecutableImage(const ByteSource& source);
 
-/// The slices of a universal image, or the whole of a thin one; at least one. Throws CodeError.
+/// The slices of a universal image, or the whole of a thin one; at least one. Throws CodeError or
+/// base::ReadFailure.
 std::vector<ImageSlice> readSlices(const ByteSource& source);
 
-/// The header of a slice. Throws CodeError if the slice is too short for one, or is not a thin image.
+/// The header of a slice. Throws CodeError if the slice is too short for one, or is not a thin image; or
+/// base::ReadFailure.
 ImageHeader readSliceHeader(const ByteSource& source, const ImageSlice& slice);
 
 /// The slice that represents all: the first of CPU type 0x0100000C, otherwise the first of 0x01000007,
 /// otherwise the first. The same on every host, so that every host looks up the same ticket.
 const ImageSlice& preferredSlice(const std::vector<ImageSlice>& slices);
 
-/// The place of a slice's signature in the file; `nullopt` if it is not signed. Throws CodeError or
-/// base::ShortRead.
+/// The place of a slice's signature in the file; `nullopt` if it is not signed. Throws CodeError,
+/// base::ShortRead or base::ReadFailure.
 std::optional<FileRange> findImageSignature(const ByteSource& source, const ImageSlice& slice);
 
 }  // namespace pinwell::codesign

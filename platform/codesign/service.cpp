@@ -30,10 +30,8 @@ template <class Body>
 auto guarded(Body body) -> decltype(body()) {
     try {
         return body();
-    } catch (const CodeError& error) {
-        return Error::osStatus(error.status());
-    } catch (const base::ShortRead&) {
-        return Error::osStatus(kInvalidSignature);
+    } catch (const std::runtime_error& failure) {
+        return Error::osStatus(asCodeError(failure).status());
     }
 }
 
@@ -116,6 +114,7 @@ class BundleWalk {
         } catch (const CodeError&) {
             // Skipped: bad code in the bundle must not hide the good code.
         } catch (const base::ShortRead&) {
+        } catch (const base::ReadFailure&) {
         }
     }
 

@@ -45,7 +45,7 @@ namespace {
 /// A whole file of the separate form; `nullopt` if it does not exist.
 std::optional<SharedBytes> readSignatureFile(const base::Places& places, const std::string& path) {
     try {
-        const FileSource file(places, path);
+        const base::FileSource file = openCode(places, path);
         return file.readShared(0, file.size());
     } catch (const CodeError& error) {
         if (error.status() == kStaticCodeNotFound) return std::nullopt;
@@ -87,7 +87,7 @@ std::shared_ptr<FileCode> FileCode::atPath(const std::string& path, const CodeAc
     const std::optional<std::string> file = bundle ? access.finder(*access.places, path) : path;
     if (!file) throw CodeError(kStaticCodeNotFound, "the directory has no main executable");
 
-    auto source = std::make_unique<FileSource>(*access.places, *file);
+    auto source = std::make_unique<base::FileSource>(openCode(*access.places, *file));
     std::optional<DiskImageTrailer> trailer = DiskImageTrailer::read(*source);
     CodeKind kind = CodeKind::opaqueFile;
     if (trailer) {

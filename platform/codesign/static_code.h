@@ -20,8 +20,8 @@
 #include <string>
 #include <vector>
 
+#include "base/byte_source.h"
 #include "base/places.h"
-#include "codesign/byte_source.h"
 #include "codesign/code_signature.h"
 #include "codesign/executable_image.h"
 #include "formats/disk_image.h"

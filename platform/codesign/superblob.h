@@ -15,11 +15,16 @@
 #include <utility>
 #include <vector>
 
-#include "codesign/byte_source.h"
+#include "base/byte_source.h"
 #include "codesign/code_signing.h"
 #include "formats/superblob.h"
 
 namespace pinwell::codesign {
+
+using base::ByteSource;
+using base::ByteView;
+using base::Data;
+using base::SharedBytes;
 
 /// Whether the signature is read from this slot: code directories, the components that they cover, and the
 /// signer's message.
@@ -37,7 +42,7 @@ struct Blob {
 std::vector<Blob> parseSuperBlob(ByteView superblob);
 
 /// The superblob in `source` at `offset`, in an area of `areaLength` bytes, without its padding. Only the
-/// superblob itself is read. Throws CodeError.
+/// superblob itself is read. Throws CodeError or base::ReadFailure.
 SharedBytes readSuperBlob(const ByteSource& source, std::uint64_t offset, std::uint64_t areaLength);
 
 /// The superblob of these blobs (slot, bytes with header), back to back in this order.

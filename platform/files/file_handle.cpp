@@ -3,9 +3,10 @@
 #include <sys/resource.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cerrno>
 #include <limits>
+#include <span>
+#include <string>
 #include <utility>
 
 #include "files/operations.h"
@@ -22,29 +23,34 @@ bool exceedsFileSizeLimit(off_t from, off_t length) {
 
 class LocalFileHandle final : public FileHandle {
   public:
-    explicit LocalFileHandle(OpenFile file) : file_(std::move(file)) {}
+    explicit LocalFileHandle(OpenFile file)
+        : file_(std::move(file)), attempt_("Cannot read " + file_.path()) {}
+
+    std::uint64_t size() const override { return static_cast<std::uint64_t>(file_.status.st_size); }
+
+    std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const override {
+        return base::readAt(file_.number(), offset, buffer, attempt_);
+    }
+
+    // The search for data moves the position.
+    std::uint64_t nextData(std::uint64_t offset) const override {
+        const off_t now = lseek(file_.number(), 0, SEEK_CUR);
+        if (now < 0) return offset;
+        const std::uint64_t data = base::nextData(file_.number(), offset);
+        if (lseek(file_.number(), now, SEEK_SET) != now) {
+            const int reason = errno;
+            throw base::ReadFailure(base::ReadFailure::Kind::unreadable,
+                                    attempt_ + ": " + Error::posix(reason).localizedFailureReason(), offset,
+                                    reason);
+        }
+        return data;
+    }
 
     std::uint64_t seekToEnd() override { return moveTo(0, SEEK_END); }
     std::uint64_t seek(std::uint64_t position) override {
         return moveTo(offset("seek in", position), SEEK_SET);
     }
     std::uint64_t position() override { return moveTo(0, SEEK_CUR); }
-
-    Data read(std::uint64_t length) override {
-        auto data = readUpTo(file_, length);
-        if (!data) fail("read", data.error());
-        return std::move(*data);
-    }
-
-    // If SEEK_DATA is unknown, or the position is past the end, there is no hole.
-    std::uint64_t nextData(std::uint64_t position) override {
-        const std::uint64_t now = moveTo(0, SEEK_CUR);
-        const off_t from = offset("seek in", position);
-        off_t data = lseek(file_.number(), from, SEEK_DATA);
-        if (data < 0 && errno == ENXIO) data = lseek(file_.number(), 0, SEEK_END);
-        moveTo(offset("seek in", now), SEEK_SET);
-        return std::max(position, static_cast<std::uint64_t>(std::max<off_t>(data, 0)));
-    }
 
     void reserve(std::uint64_t length) override {
         const off_t size = offset("reserve room in", length);
@@ -79,8 +85,8 @@ class LocalFileHandle final : public FileHandle {
 
   private:
     [[noreturn]] void fail(const char* attempt, const Error& error) const {
-        throw FileHandleError(std::string("Cannot ") + attempt + " " + file_.path() + ": " +
-                              error.localizedFailureReason());
+        throw base::FileFailure(std::string("Cannot ") + attempt + " " + file_.path() + ": " +
+                                error.localizedFailureReason());
     }
 
     off_t offset(const char* attempt, std::uint64_t position) const {
@@ -96,6 +102,7 @@ class LocalFileHandle final : public FileHandle {
     }
 
     OpenFile file_;
+    std::string attempt_;  // for the reason text of a failed read
 };
 
 }  // namespace

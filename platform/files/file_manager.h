@@ -12,10 +12,10 @@
 #include <optional>
 #include <string>
 
+#include "base/byte_source.h"
 #include "base/bytes.h"
 #include "base/error.h"
 #include "base/places.h"
-#include "files/file_reader.h"
 #include "values/url.h"
 #include "values/value.h"
 
@@ -72,10 +72,17 @@ struct ResourceProperties {
     Dictionary dictionary() const;
 };
 
-/// An open regular file that can also be written; a write past its end leaves a hole. The operations throw
-/// FileHandleError; the destructor closes the file and ignores errors.
-class FileHandle : public FileReader {
+/// An open regular file: it is read at any offset, and can also be written, at a position of its own. A write
+/// past its end leaves a hole. Its size() is that at opening. The operations throw base::FileFailure, whose
+/// reason text names the operation and the file; the destructor closes the file and ignores errors.
+class FileHandle : public base::ByteSource {
   public:
+    /// Both return the new position for writing, in bytes from the start; it is 0 at first. A position past
+    /// the end is allowed. Reading neither uses nor moves it.
+    virtual std::uint64_t seekToEnd() = 0;
+    virtual std::uint64_t seek(std::uint64_t position) = 0;
+    virtual std::uint64_t position() = 0;
+
     /// Reserves space on the volume for the next `length` bytes from the position on, if the file system
     /// can. Does not change the file's length. So a full volume is detected here, before anything is
     /// overwritten.

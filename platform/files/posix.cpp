@@ -6,8 +6,6 @@
 #include <algorithm>
 #include <utility>
 
-#include "base/file_io.h"
-
 namespace pinwell::files {
 std::string directoryOf(const std::string& path) {
     const std::size_t slash = path.rfind('/');
@@ -16,7 +14,7 @@ std::string directoryOf(const std::string& path) {
 }
 
 Result<OpenFile> openRegularFile(const Place& place, int flags, mode_t mode) {
-    auto file = base::openRegularFile(place.directory(), place.name, flags | O_NOFOLLOW, place.path, mode);
+    auto file = place.openRegularFile(flags, mode);
     if (!file) return file.error();
     return OpenFile{std::move(file->descriptor), place, file->status};
 }
@@ -44,13 +42,6 @@ Result<void> writeAll(const OpenFile& file, ByteView bytes) {
         bytes = bytes.subspan(static_cast<std::size_t>(count));
     }
     return {};
-}
-
-Result<Data> readUpTo(const OpenFile& file, std::uint64_t length) {
-    auto data = readPieces(
-        length, [&](std::byte* into, std::size_t size) { return ::read(file.number(), into, size); });
-    if (!data) return lastError(file.path());
-    return *std::move(data);
 }
 
 Result<void> flush(int descriptor, const std::string& path) {

@@ -4,9 +4,7 @@
 
 #include <sys/stat.h>
 
-#include <algorithm>
 #include <cerrno>
-#include <optional>
 #include <string>
 #include <utility>
 
@@ -22,9 +20,8 @@ using base::FileDescriptor;
 using base::Place;
 using base::Places;
 
-/// Maximum number of bytes in one read or write, and so the maximum growth of memory at a time.
+/// Maximum number of bytes in one read or write.
 inline constexpr std::size_t kPieceSize = std::size_t{256} * 1024;
-inline constexpr std::size_t kFirstPieceSize = std::size_t{4} * 1024;
 
 /// The result of `call`, repeated while a signal interrupts it.
 template <class Call>
@@ -57,7 +54,7 @@ std::string directoryOf(const std::string& path);
 inline constexpr mode_t kPrivateFile = S_IRUSR | S_IWUSR;
 inline constexpr mode_t kOrdinaryFile = S_IRUSR | S_IWUSR | S_IRGRP | S_IWGRP | S_IROTH | S_IWOTH;
 
-/// Like base::openRegularFile, without following a link in the last component.
+/// Like Place::openRegularFile().
 Result<OpenFile> openRegularFile(const Place& place, int flags, mode_t mode = kPrivateFile);
 
 /// Creates and opens a file for writing; `place` must not exist yet.
@@ -67,27 +64,6 @@ Result<OpenFile> createFile(const Place& place, mode_t mode = kPrivateFile);
 Result<FileDescriptor> openDirectory(const Place& place);
 
 Result<void> writeAll(const OpenFile& file, ByteView bytes);
-
-/// Reads with `readPiece`(buffer, size), which returns the same as read(2), until `length` bytes are read or
-/// the file ends; `nullopt` if a piece fails.
-template <class ReadPiece>
-std::optional<Data> readPieces(std::uint64_t length, ReadPiece readPiece) {
-    Data data;
-    while (data.size() < length) {
-        const std::size_t had = data.size();
-        // Starts small: most files are small, and new memory costs more than another call.
-        const std::size_t piece = std::clamp(had, kFirstPieceSize, kPieceSize);
-        data.resize(had + static_cast<std::size_t>(std::min<std::uint64_t>(length - had, piece)));
-        const ssize_t count = uninterrupted([&] { return readPiece(data.data() + had, data.size() - had); });
-        if (count < 0) return std::nullopt;
-        data.resize(had + static_cast<std::size_t>(count));
-        if (count == 0) break;
-    }
-    return data;
-}
-
-/// Reads from the current position until `length` bytes are read or the file ends.
-Result<Data> readUpTo(const OpenFile& file, std::uint64_t length);
 
 /// Returns when the file or directory of `descriptor` is on stable storage.
 Result<void> flush(int descriptor, const std::string& path);

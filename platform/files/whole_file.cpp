@@ -8,6 +8,7 @@
 #include <system_error>
 #include <utility>
 
+#include "base/file_io.h"
 #include "files/operations.h"
 
 namespace pinwell::files {
@@ -98,9 +99,7 @@ Result<Data> readWholeFile(const Place& place) {
     const auto file = openRegularFile(place, O_RDONLY);
     if (!file) return file.error();
     if (file->status.st_size > static_cast<off_t>(kMaximumWholeFile)) return Error::posix(EFBIG, place.path);
-    auto contents = readUpTo(*file, kMaximumWholeFile + 1);
-    if (contents && contents->size() > kMaximumWholeFile) return Error::posix(EFBIG, place.path);
-    return contents;
+    return base::readSmallFile(file->descriptor, place.path, kMaximumWholeFile);
 }
 
 Result<void> writeFileAtomically(ByteView contents, const Place& place) {

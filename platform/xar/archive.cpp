@@ -2,11 +2,8 @@
 #include <xar/xar.h>
 
 #include <fcntl.h>
-#include <sys/types.h>
-#include <unistd.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <charconv>
 #include <cstdlib>
 #include <exception>
@@ -17,6 +14,7 @@
 #include <utility>
 #include <vector>
 
+#include "base/byte_source.h"
 #include "base/bytes.h"
 #include "base/file_io.h"
 #include "base/handle.h"
@@ -34,14 +32,6 @@ constexpr std::size_t kDigestedAtOnce = std::size_t{64} * 1024;
 constexpr std::string_view kOffsetPath = "checksum/offset";
 constexpr std::string_view kSizePath = "checksum/size";
 constexpr std::string_view kNoChecksumStyle = "none";
-
-template <class Call>
-auto uninterrupted(Call call) {
-    for (;;) {
-        const auto answer = call();
-        if (answer != -1 || errno != EINTR) return answer;
-    }
-}
 
 // The number at the start of a property's text, as in strtoull(3), with any text after it. `nullopt` without
 // digits, with a minus sign or with too many digits.
@@ -72,26 +62,25 @@ class Archive {
     const base::Data& checksum() const noexcept { return checksum_; }
 
   private:
-    Archive() = default;
+    explicit Archive(base::FileSource file) : file_(std::move(file)) {}
 
-    bool openFile(const std::string& path);
     std::optional<base::Data> read(std::uint64_t offset, std::size_t length) const;
     bool readTable(const Header& header);
     bool isChecksumDescribed(std::optional<Digest> digest) const;
     bool isChecksumStored() const;
 
-    base::FileDescriptor file_;
-    std::uint64_t fileSize_ = 0;
+    base::FileSource file_;
     std::uint64_t heapStart_ = 0;
     TableOfContents table_;
     base::Data checksum_;
 };
 
 std::unique_ptr<Archive> Archive::open(const std::string& path) {
-    std::unique_ptr<Archive> archive(new Archive);
-    if (!archive->openFile(path)) return nullptr;
+    auto file = base::openRegularFile(path, O_RDONLY);
+    if (!file) return nullptr;
+    std::unique_ptr<Archive> archive(new Archive(base::FileSource(*std::move(file))));
     const auto start = archive->read(
-        0, static_cast<std::size_t>(std::min<std::uint64_t>(kLongestHeaderRead, archive->fileSize_)));
+        0, static_cast<std::size_t>(std::min<std::uint64_t>(kLongestHeaderRead, archive->file_.size())));
     const auto header = start ? parseHeader(*start) : std::nullopt;
     if (!header || !archive->readTable(*header) || !archive->isChecksumDescribed(header->digest))
         return nullptr;
@@ -99,31 +88,17 @@ std::unique_ptr<Archive> Archive::open(const std::string& path) {
     return archive;
 }
 
-bool Archive::openFile(const std::string& path) {
-    auto file = base::openRegularFile(path, O_RDONLY);
-    if (!file) return false;
-    file_ = std::move(file->descriptor);
-    fileSize_ = static_cast<std::uint64_t>(file->status.st_size);
-    return true;
-}
-
 // All of the bytes, or `nullopt`.
 std::optional<Data> Archive::read(std::uint64_t offset, std::size_t length) const {
-    if (offset > fileSize_ || length > fileSize_ - offset) return std::nullopt;
-    Data bytes(length);
-    std::size_t had = 0;
-    while (had < length) {
-        const auto at = static_cast<off_t>(offset + had);
-        const ssize_t count =
-            uninterrupted([&] { return pread(file_.get(), &bytes[had], length - had, at); });
-        if (count <= 0) return std::nullopt;
-        had += static_cast<std::size_t>(count);
+    try {
+        return file_.read(offset, length);
+    } catch (const base::ReadFailure&) {
+        return std::nullopt;
     }
-    return bytes;
 }
 
 bool Archive::readTable(const Header& header) {
-    if (header.size > fileSize_ || header.compressedLength > fileSize_ - header.size) return false;
+    if (header.size > file_.size() || header.compressedLength > file_.size() - header.size) return false;
     if (header.compressedLength > kMaximumTableOfContents) return false;
 
     TableOfContentsReader reader;
@@ -170,7 +145,7 @@ bool Archive::isChecksumStored() const {
     };
     const auto offset = number(kOffsetPath, 0);
     const auto size = number(kSizePath, checksum_.size());
-    if (!offset || *offset > fileSize_ - heapStart_ || size != checksum_.size()) return false;
+    if (!offset || *offset > file_.size() - heapStart_ || size != checksum_.size()) return false;
     return read(heapStart_ + *offset, checksum_.size()) == checksum_;
 }
 

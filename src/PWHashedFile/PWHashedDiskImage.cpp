@@ -122,7 +122,7 @@ bool PWHashedDiskImage::populateHeader() {
         NoisyLog("Could not get disk image header from %@. %@", name, opened.error());
         return signature_.refuse(0, "the file cannot be opened");
     }
-    files::FileHandle& file = **opened;
+    const base::ByteSource& file = **opened;
     if (!readDiskImageTrailer(file, name, signature_, diagnostics)) return false;
     if (signature_.isSigned()) {
         endOfDMGData_ = signature_.csStart;
@@ -226,7 +226,7 @@ bool PWHashedDiskImage::writeSignature(base::SparseBuffer signatureAndTrailer, c
     try {
         writeAtEndOfData(**opened, signatureAndTrailer.view(), name);
         return true;
-    } catch (const files::FileHandleError& failure) {
+    } catch (const base::FileFailure& failure) {
         NoisyLog("Fatal error while %@ ticket to %@. %@.",
                  deleteExisting ? "deleting existing" : "writing new", target.path(), failure.what());
         return false;

@@ -141,7 +141,7 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
         if (target == fileURL()) copy = saveMovedTrailers(**opened, tail);
         writeTail(**opened, tail.view().subspan(kTrailerSize), targetName);
         if (copy) static_cast<void>(platform().files.removeItem(*copy));
-    } catch (const files::FileHandleError& failure) {
+    } catch (const base::FileFailure& failure) {
         if (copy) NoisyLog("The trailers of %@ are kept in %@.", targetName, copy->path());
         NoisyLog("Fatal error while %@ ticket to %@. %@.",
                  deleteExisting ? "deleting existing" : "writing new", target.path(), failure.what());
@@ -155,7 +155,7 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
 base::SparseBuffer PWHashedFlatPackage::tailWith(ByteView ticket) const {
     const ByteView moved = trailers_.dataToAppend ? trailers_.dataToAppend->view() : ByteView();
     const std::size_t recordSize = ticket.empty() ? 0 : kTrailerSize;
-    base::SparseBuffer tail = files::makeBuffer(kTrailerSize + moved.size() + ticket.size() + recordSize);
+    base::SparseBuffer tail = base::makeBuffer(kTrailerSize + moved.size() + ticket.size() + recordSize);
     tail.put(kTrailerSize, moved);
     if (ticket.empty()) return tail;
     tail.put(kTrailerSize + moved.size(), ticket);
@@ -172,11 +172,10 @@ std::optional<URL> PWHashedFlatPackage::saveMovedTrailers(files::FileHandle& fil
     if (!trailers_.dataToAppend || trailers_.ticketStart < kTrailerSize) return std::nullopt;
     const std::uint64_t offset = trailers_.ticketStart - kTrailerSize;
     try {
-        file.seek(offset);
-        const Data before = file.read(kTrailerSize);
+        const Data before = file.readUpTo(offset, kTrailerSize);
         if (before.size() != kTrailerSize) return std::nullopt;
         tail.put(0, before);
-    } catch (const files::FileHandleError&) {
+    } catch (const base::ReadFailure&) {
         return std::nullopt;
     }
     files::FileManager& files = platform().files;

@@ -9,6 +9,7 @@
 #include <mutex>
 #include <optional>
 #include <ostream>
+#include <span>
 #include <utility>
 
 #include "base/bytes.h"
@@ -21,7 +22,6 @@ using base::Error;
 using files::ByteView;
 using files::Data;
 using files::FileHandle;
-using files::FileHandleError;
 using files::Result;
 using files::URL;
 
@@ -121,10 +121,12 @@ class RecordingFileManager::Handle final : public FileHandle {
     std::uint64_t seekToEnd() override { return note("seekToEnd"), real_->seekToEnd(); }
     std::uint64_t seek(std::uint64_t position) override { return note("seek"), real_->seek(position); }
     std::uint64_t position() override { return note("position"), real_->position(); }
-    Data read(std::uint64_t length) override {
-        return note("read"), real_->read(record_->readableOf(length));
+    std::uint64_t size() const override { return noteReading("size"), real_->size(); }
+    std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const override {
+        noteReading("read");
+        return real_->readAt(offset, buffer.first(record_->readableOf(buffer.size())));
     }
-    std::uint64_t nextData(std::uint64_t position) override { return real_->nextData(position); }
+    std::uint64_t nextData(std::uint64_t offset) const override { return real_->nextData(offset); }
     void reserve(std::uint64_t length) override { note("reserve"), real_->reserve(length); }
     void write(ByteView bytes) override { note("write"), real_->write(bytes); }
     void truncate(std::uint64_t length) override { note("truncate"), real_->truncate(length); }
@@ -132,9 +134,20 @@ class RecordingFileManager::Handle final : public FileHandle {
     void close() override { note("close"), real_->close(); }
 
   private:
+    // Records the operation; returns the reason text if it must fail.
+    std::optional<std::string> failureOf(const char* name) const {
+        const auto failure = record_->note(std::string("handle.") + name, path_);
+        if (!failure) return std::nullopt;
+        return std::string("Cannot ") + name + " " + failure->localizedDescription();
+    }
+
     void note(const char* name) {
-        if (const auto failure = record_->note(std::string("handle.") + name, path_))
-            throw FileHandleError(std::string("Cannot ") + name + " " + failure->localizedDescription());
+        if (const auto reason = failureOf(name)) throw base::FileFailure(*reason);
+    }
+
+    void noteReading(const char* name) const {
+        if (const auto reason = failureOf(name))
+            throw base::ReadFailure(base::ReadFailure::Kind::unreadable, *reason);
     }
 
     std::unique_ptr<FileHandle> real_;

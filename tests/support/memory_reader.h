@@ -1,38 +1,35 @@
-// A file in memory, for parsers.
+// A file in memory with a broken sector, for parsers.
 #pragma once
 
 #include <algorithm>
 #include <cstdint>
 #include <limits>
+#include <span>
 #include <utility>
 
-#include "files/file_reader.h"
+#include "base/byte_source.h"
 
 namespace pinwell::test {
 
 /// Reads its bytes like an open file. Reads that touch the byte at `broken` fail.
-class MemoryReader : public files::FileReader {
+class MemoryReader : public base::ByteSource {
   public:
     static constexpr std::uint64_t kNowhere = std::numeric_limits<std::uint64_t>::max();
 
     explicit MemoryReader(base::Data bytes, std::uint64_t broken = kNowhere)
         : bytes_(std::move(bytes)), broken_(broken) {}
 
-    std::uint64_t seekToEnd() override { return position_ = bytes_.size(); }
-    std::uint64_t seek(std::uint64_t position) override { return position_ = position; }
-    std::uint64_t position() override { return position_; }
-    base::Data read(std::uint64_t length) override {
-        const std::uint64_t begin = std::min<std::uint64_t>(position_, bytes_.size());
-        const std::uint64_t end = begin + std::min<std::uint64_t>(length, bytes_.size() - begin);
-        if (broken_ >= begin && broken_ < end) throw files::FileHandleError("a broken sector");
-        position_ = end;
-        return base::toData(base::ByteView(bytes_).subspan(begin, end - begin));
+    std::uint64_t size() const override { return bytes_.size(); }
+    std::size_t readAt(std::uint64_t offset, std::span<std::byte> buffer) const override {
+        const std::size_t count = bytes_.readAt(offset, buffer);
+        if (broken_ >= offset && broken_ - offset < count)
+            throw base::ReadFailure(base::ReadFailure::Kind::unreadable, "a broken sector", broken_);
+        return count;
     }
 
   private:
-    base::Data bytes_;
+    base::MemorySource bytes_;
     std::uint64_t broken_;
-    std::uint64_t position_ = 0;
 };
 
 }  // namespace pinwell::test

@@ -22,7 +22,7 @@ using codesign::CodeError;
 constexpr std::size_t kRefusal = 4 * kKibibyte;
 
 // Bytes that count the reads, and the bytes read.
-class CountingSource final : public codesign::ByteSource {
+class CountingSource final : public base::ByteSource {
   public:
     explicit CountingSource(Data bytes, std::uint64_t size = 0)
         : bytes_(std::move(bytes)), size_(std::max<std::uint64_t>(size, bytes_.size())) {}

@@ -13,10 +13,9 @@
 namespace pinwell::test {
 namespace {
 
+using base::MemorySource;
 using base::ShortRead;
 using codesign::CodeError;
-using codesign::FileSource;
-using codesign::MemorySource;
 using codesign::parseSuperBlob;
 using codesign::readSuperBlob;
 
@@ -171,8 +170,8 @@ TEST(SuperBlobInAFile, RefusesAnAreaShorterThanItself) {
 }
 
 TEST(SuperBlobInAFile, RefusesAnAreaBeyondTheFile) {
-    EXPECT_THROW(readSuperBlob(MemorySource(Data(100)), 101, 12), CodeError);
-    EXPECT_THROW(readSuperBlob(MemorySource(Data(100)), 0xFFFFFFFFFFFFFFFF, 12), CodeError);
+    EXPECT_THROW(readSuperBlob(MemorySource(Data(100)), 101, 12), base::ReadFailure);
+    EXPECT_THROW(readSuperBlob(MemorySource(Data(100)), 0xFFFFFFFFFFFFFFFF, 12), base::ReadFailure);
 }
 
 // A file with zeros after the blobs.
@@ -181,7 +180,7 @@ TEST(SuperBlobInAFile, TakesMemoryForExistingBytesWhateverItsLength) {
     const std::string path = directory / "signed";
     writeFile(path, ByteView(threeBlobs().length(0xFFFFFFFF).build()));
     std::filesystem::resize_file(path, 0xFFFFFFFF);
-    const FileSource source(base::Places(), path);
+    const base::FileSource source = codesign::openCode(base::Places(), path);
     const std::size_t before = residentMemory();
     const base::SharedBytes superblob = readSuperBlob(source, 0, source.size());
     EXPECT_EQ(superblob.size(), 0xFFFFFFFF);

@@ -383,7 +383,7 @@ TEST_F(FailingCalls, OfAHandleAreReportedWithTheOperation) {
         {"lseek", [](files::FileHandle& handle) { handle.seekToEnd(); }, "seek in"},
         {"lseek", [](files::FileHandle& handle) { handle.seek(1); }, "seek in"},
         {"lseek", [](files::FileHandle& handle) { handle.position(); }, "seek in"},
-        {"read", [](files::FileHandle& handle) { handle.read(1); }, "read"},
+        {"pread", [](files::FileHandle& handle) { handle.readUpTo(0, 1); }, "read"},
         {"write", [](files::FileHandle& handle) { handle.write(asBytes("x")); }, "write to"},
         {"ftruncate", [](files::FileHandle& handle) { handle.truncate(1); }, "truncate"},
         {"fsync", [](files::FileHandle& handle) { handle.synchronize(); }, "synchronize"},
@@ -397,7 +397,7 @@ TEST_F(FailingCalls, OfAHandleAreReportedWithTheOperation) {
             const Trouble trouble = Trouble::atEvery({row.call}, EIO);
             try {
                 row.operation(**handle);
-            } catch (const files::FileHandleError& failure) {
+            } catch (const base::FileFailure& failure) {
                 reason = failure.what();
             }
         }
@@ -422,8 +422,7 @@ void doAll(FileManager& manager, const TemporaryDirectory& directory) {
         ASSERT_THAT(handle, Succeeds());
         EXPECT_EQ((*handle)->seekToEnd(), contents.size());
         (*handle)->write(asBytes("more"));
-        (*handle)->seek(0);
-        EXPECT_EQ(base::toString((*handle)->read(6000)), contents + "more");
+        EXPECT_EQ(base::toString((*handle)->readUpTo(0, 6000)), contents + "more");
         (*handle)->truncate(4000);
         (*handle)->synchronize();
         (*handle)->close();

@@ -15,7 +15,6 @@ namespace {
 using base::asBytes;
 using base::toString;
 using files::FileHandle;
-using files::FileHandleError;
 using testing::EndsWith;
 using testing::HasSubstr;
 using testing::StartsWith;
@@ -39,7 +38,7 @@ class Handle : public FilesTest {
     std::string reasonOf(Operation operation) {
         try {
             operation();
-        } catch (const FileHandleError& failure) {
+        } catch (const base::FileFailure& failure) {
             return failure.what();
         }
         ADD_FAILURE() << "did not fail";
@@ -47,34 +46,45 @@ class Handle : public FilesTest {
     }
 };
 
-TEST_F(Handle, ReadsFromWhereItIs) {
+TEST_F(Handle, ReadsAnywhereAndKeepsItsPosition) {
     const auto handle = reading("0123456789");
     EXPECT_EQ(handle->position(), 0U);
-    EXPECT_EQ(toString(handle->read(4)), "0123");
-    EXPECT_EQ(handle->position(), 4U);
+    EXPECT_EQ(toString(handle->readUpTo(0, 4)), "0123");
+    EXPECT_EQ(handle->position(), 0U);
     EXPECT_EQ(handle->seek(8), 8U);
-    EXPECT_EQ(toString(handle->read(2)), "89");
+    EXPECT_EQ(toString(handle->readUpTo(4, 2)), "45");
+    EXPECT_EQ(handle->position(), 8U);
+}
+
+TEST_F(Handle, PassesOverHolesAndKeepsItsPosition) {
+    const auto handle = updating("data");
+    handle->seek(3);
+    handle->truncate(10U << 20U);
+    EXPECT_EQ(handle->nextData(0), 0U);
+    EXPECT_EQ(toString(handle->readSharedUpTo(0, 10U << 20U)), "data" + std::string((10U << 20U) - 4, '\0'));
+    EXPECT_EQ(handle->position(), 3U);
 }
 
 TEST_F(Handle, ReadsLessOnlyAtTheEnd) {
     const std::string contents = irregularBytes(600'001);
     const auto handle = reading(contents);
-    EXPECT_EQ(toString(handle->read(600'000)), contents.substr(0, 600'000));
-    EXPECT_EQ(handle->read(100).size(), 1U);
-    EXPECT_EQ(handle->read(100).size(), 0U);
+    EXPECT_EQ(toString(handle->readUpTo(0, 600'000)), contents.substr(0, 600'000));
+    EXPECT_EQ(handle->readUpTo(600'000, 100).size(), 1U);
+    EXPECT_EQ(handle->readUpTo(600'001, 100).size(), 0U);
 }
 
 TEST_F(Handle, ReadsTheExistingBytesIfFarMoreAreRequested) {
     const auto handle = reading("all");
-    EXPECT_EQ(toString(handle->read(std::numeric_limits<std::uint64_t>::max())), "all");
+    EXPECT_EQ(toString(handle->readUpTo(0, std::numeric_limits<std::uint64_t>::max())), "all");
 }
 
 TEST_F(Handle, ReadsNothingForALengthOfZero) {
-    EXPECT_TRUE(reading("all")->read(0).empty());
+    EXPECT_TRUE(reading("all")->readUpTo(0, 0).empty());
 }
 
 TEST_F(Handle, ReportsTheEnd) {
     const auto handle = reading("0123456789");
+    EXPECT_EQ(handle->size(), 10U);
     EXPECT_EQ(handle->seekToEnd(), 10U);
     EXPECT_EQ(handle->position(), 10U);
 }
@@ -82,7 +92,7 @@ TEST_F(Handle, ReportsTheEnd) {
 TEST_F(Handle, SeeksPastTheEndAndReadsNothingThere) {
     const auto handle = reading("0123456789");
     EXPECT_EQ(handle->seek(100), 100U);
-    EXPECT_TRUE(handle->read(1).empty());
+    EXPECT_TRUE(handle->readUpTo(100, 1).empty());
 }
 
 TEST_F(Handle, RefusesAPositionThatNoFileHas) {
@@ -179,7 +189,7 @@ TEST_F(Handle, ClosesOnceAndIsOfNoUseAfterwards) {
     handle->close();
     EXPECT_EQ(openFileCount(), before - 1);
     EXPECT_NO_THROW(handle->close());
-    EXPECT_THAT(reasonOf([&] { handle->read(1); }), EndsWith("Bad file descriptor"));
+    EXPECT_THAT(reasonOf([&] { handle->readUpTo(0, 1); }), EndsWith("Bad file descriptor"));
     EXPECT_THAT(reasonOf([&] { handle->write(asBytes("y")); }), EndsWith("Bad file descriptor"));
     EXPECT_THAT(reasonOf([&] { handle->seek(0); }), EndsWith("Bad file descriptor"));
     EXPECT_THAT(reasonOf([&] { handle->position(); }), EndsWith("Bad file descriptor"));

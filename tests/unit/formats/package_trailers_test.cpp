@@ -252,7 +252,7 @@ TEST(PackageTrailerSurvey, EndsAtARecordWhoseDataWouldBeginBeforeTheFile) {
 TEST(PackageTrailerSurvey, ThrowsIfARecordCannotBeRead) {
     const std::string package = PackageBuilder().terminator().ticket("ticket").build();
     test::MemoryReader file(base::toData(base::asBytes(package)), package.size() - 1);
-    EXPECT_THROW(surveyPackageTrailers(file, [](const SurveyedTrailer&) {}), files::FileHandleError);
+    EXPECT_THROW(surveyPackageTrailers(file, [](const SurveyedTrailer&) {}), base::ReadFailure);
 }
 
 TEST(PackageTrailerWalk, TurnsAReadErrorIntoAFaultAndADiagnosticLine) {

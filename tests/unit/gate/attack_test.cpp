@@ -5,7 +5,7 @@
 #include <algorithm>
 #include <filesystem>
 
-#include "codesign/byte_source.h"
+#include "base/byte_source.h"
 #include "gate_fixture.h"
 #include "lumora-local/samples.h"
 #include "support/archive_builder.h"
@@ -145,7 +145,7 @@ std::vector<verify::Check> checksOfTable(const std::string& files) {
                              .build();
     verify::Workers workers(1);
     verify::Section section;
-    verify::verifyPackage(codesign::MemorySource(archive), workers, section);
+    verify::verifyPackage(base::MemorySource(archive), workers, section);
     return verify::flattened(section);
 }
 

@@ -3,7 +3,7 @@
 
 #include <gmock/gmock.h>
 
-#include "codesign/byte_source.h"
+#include "base/byte_source.h"
 #include "support/archive_builder.h"
 #include "support/tabled_image_builder.h"
 #include "verify/check.h"
@@ -11,8 +11,8 @@
 namespace pinwell::test {
 namespace {
 
+using base::MemorySource;
 using codesign::DiskImageTrailer;
-using codesign::MemorySource;
 using testing::AllOf;
 using testing::Contains;
 using testing::Each;

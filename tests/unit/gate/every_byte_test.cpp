@@ -6,8 +6,8 @@
 #include <fstream>
 #include <functional>
 
+#include "base/byte_source.h"
 #include "base/text.h"
-#include "codesign/byte_source.h"
 #include "gate_fixture.h"
 #include "lumora-local/samples.h"
 #include "support/code_directory_builder.h"
@@ -18,7 +18,7 @@
 namespace pinwell::test {
 namespace {
 
-using codesign::MemorySource;
+using base::MemorySource;
 using testing::IsEmpty;
 using verify::Section;
 using verify::VerifiedCode;
