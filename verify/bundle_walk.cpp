@@ -3,7 +3,6 @@
 #include <array>
 #include <utility>
 
-#include "base/byte_io.h"
 #include "base/text.h"
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"

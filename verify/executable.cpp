@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <utility>
 
-#include "base/byte_io.h"
 #include "base/bytes.h"
 #include "codesign/cms_signature.h"
 #include "codesign/code_error.h"
