@@ -30,13 +30,14 @@ function(pinwell_tests_are kind)
   endforeach()
 endfunction()
 
-# pinwell_test(NAME [WHOLE] [SHARDS COUNT] [SLOW] [THREADS] [VOLUMES FILTER] [SWEEPS FILTER]
+# pinwell_test(NAME [WHOLE] [SHARDS COUNT] [SLOW] [LONG] [THREADS] [VOLUMES FILTER] [SWEEPS FILTER]
 # [TIMEOUT SECONDS] SOURCES...): a GoogleTest program of the kind PINWELL_TEST_KIND.
 # Every test in it is a test of ctest. With WHOLE the program is one test: for tables of many quick rows.
 # PINWELL_WHOLE_TESTS does the same for a folder. SHARDS splits a whole program into this number of parts, which run
 # side by side.
 # SLOW gives its tests the label "slow": scripts/test leaves them out after an edit, and runs them for a release. Without
 # PINWELL_SLOW_TESTS the program has no tests, and is built only by its name.
+# LONG starts a whole program before the others, because it takes longer than they do, or waits.
 # THREADS gives a whole program the label "threads", and adds it to the target "threaded_tests": the tested code uses
 # several threads, and ThreadSanitizer runs it.
 # VOLUMES is a --gtest_filter for the tests of a whole program that mount volumes. They are the test NAME.volumes, of the
@@ -44,7 +45,7 @@ endfunction()
 # SWEEPS is a --gtest_filter for the long forms of a whole program's other tests. They are the test NAME.sweeps, with the
 # label "slow".
 function(pinwell_test name)
-  cmake_parse_arguments(PARSE_ARGV 1 test "WHOLE;SLOW;THREADS" "TIMEOUT;SHARDS;VOLUMES;SWEEPS" "")
+  cmake_parse_arguments(PARSE_ARGV 1 test "WHOLE;SLOW;LONG;THREADS" "TIMEOUT;SHARDS;VOLUMES;SWEEPS" "")
   if(NOT PINWELL_TEST_KIND IN_LIST PINWELL_TEST_KINDS)
     message(FATAL_ERROR "${name}: set PINWELL_TEST_KIND to one of ${PINWELL_TEST_KINDS}")
   endif()
@@ -57,6 +58,9 @@ function(pinwell_test name)
     set(test_TIMEOUT 120)
   endif()
   set(properties TIMEOUT ${test_TIMEOUT})
+  if(test_LONG)
+    list(APPEND properties COST 100)
+  endif()
   set(labels)
   if(test_SLOW)
     list(APPEND labels slow)
