@@ -1,7 +1,7 @@
 // Positional reading of an artefact's bytes, without loading all of them: from an open file or from memory.
 //
-// This is the only way to read at an offset. A length that comes from a file sizes an allocation only up to
-// kReadAtOnce; longer ranges are read as SharedBytes, which take memory only for non-zero bytes.
+// read() is for lengths that the caller has compared with a named maximum. Lengths that only a file claims are
+// for readShared(): a range above kReadAtOnce takes memory only for non-zero bytes.
 #pragma once
 
 #include <array>
@@ -69,7 +69,7 @@ class ByteSource {
   public:
     virtual ~ByteSource() = default;
 
-    /// Throws ReadFailure (unreadable) if it depends on the system and the system does not say.
+    /// Throws ReadFailure (unreadable) if the size cannot be found out.
     virtual std::uint64_t size() const = 0;
 
     /// Exactly `length` bytes from `offset`. Throws ReadFailure: pastEnd if the range is not within size(),
