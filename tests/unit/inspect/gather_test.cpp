@@ -1,4 +1,5 @@
 // The findings about artefacts of every kind with intact tickets.
+#include <algorithm>
 #include <cerrno>
 
 #include "base/bytes.h"
@@ -264,6 +265,19 @@ TEST_F(Inspection, OfAFileThatCannotBeOpenedSaysWhyNot) {
     const Report report = inspect(path);
     EXPECT_EQ(report.outcome, Outcome::unreadable);
     EXPECT_EQ(report.conclusion, "The file cannot be read: Permission denied.");
+}
+
+TEST_F(Inspection, OfAPackageThatCannotBeOpenedTwiceSaysWhyNot) {
+    const Artefact package = signedPackage();
+    const std::string path = stapled(package, ticketFor(package));
+    inspect(path);
+    const std::vector<std::string> names = platform.files.names();
+    const auto last = std::find(names.rbegin(), names.rend(), "openForReading");
+    platform.files.failOperation(names.size() + static_cast<std::size_t>(names.rend() - last) - 1, EMFILE);
+    const Report report = inspect(path);
+    EXPECT_FALSE(report.ticket);
+    EXPECT_EQ(report.fault->rule, "the package cannot be read: Too many open files");
+    EXPECT_NE(report.outcome, Outcome::good);
 }
 
 TEST_F(Inspection, OfAPackageThatIsADirectoryReportsIt) {

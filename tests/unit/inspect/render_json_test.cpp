@@ -49,6 +49,42 @@ TEST_F(JsonObject, HasTheSameMembersOnEveryOutcome) {
     EXPECT_EQ(membersOf(parsed(inspect(platform.directory / "missing"))), members);
 }
 
+TEST_F(JsonObject, NamesKindOutcomeAndPlace) {
+    const auto expect = [&](const std::string& path, const std::string& kind, const std::string& outcome,
+                            const std::string& place) {
+        const Value json = parsed(inspect(path));
+        EXPECT_EQ(text(json["kind"]), kind) << path;
+        EXPECT_EQ(text(json["outcome"]), outcome) << path;
+        const bool hasPlace = json["place"].dictionary() != nullptr;
+        EXPECT_EQ(hasPlace ? text(json["place"]["form"]) : "", place) << path;
+        EXPECT_EQ(json["exitStatus"].unsignedIntegerValue(), outcome == "good"         ? 0U
+                                                             : outcome == "unreadable" ? 66U
+                                                                                       : 65U);
+    };
+    const TicketPayloadBuilder payload = TicketPayloadBuilder().entry(2, bundleHash);
+    const Artefact image = signedImage();
+    const Artefact package = signedPackage();
+    expect(bundle(), "bundle", "noTicket", "file");
+    expect(bundle(sealed(TicketPayloadBuilder(payload).revoked())), "bundle", "revoked", "file");
+    expect(stapled(image, sealed(payload)), "diskImage", "refused", "superblob");
+    expect(stapled(package, ticketFor(package)), "package", "good", "trailers");
+    expect(write("a.ticket", base::toString(sealed(payload))), "ticket", "good", "file");
+    expect(write("notes.txt", "hello"), "other", "unreadable", "");
+    const std::string program = write("tool", base::toString(ExecutableImageBuilder().build()));
+    setMode(program, 0755);
+    expect(program, "executable", "noTicket", "");
+}
+
+TEST_F(JsonObject, HasTheFaultAtBothOffsets) {
+    const Artefact image = unsignedImage();
+    Data ticket = ticketFor(image);
+    ticket[4] = std::byte{9};
+    const Value fault = parsed(inspect(stapled(image, ticket)))["fault"];
+    EXPECT_EQ(text(fault["rule"]), "the container's version is not 1");
+    EXPECT_EQ(fault["offset"].unsignedIntegerValue(), 4U);
+    EXPECT_EQ(fault["fileOffset"].unsignedIntegerValue(), 100'000U + 20 + 8 + 4);
+}
+
 TEST_F(JsonObject, OfADamagedTicketHasTheMembersOfAWholeOne) {
     const auto ticketMembers = [&](const std::string& bytes) {
         return membersOf(parsed(inspect(write("a.ticket", bytes)))["ticket"]);
