@@ -59,6 +59,10 @@ std::vector<std::string> filesOf(const std::string& root) {
     return names;
 }
 
+mode_t modeOf(const std::string& name) {
+    return name.ends_with(".key") ? kPrivateFileMode : kPublicFileMode;
+}
+
 /// Whether a backup may make a file of this name: below service or platform, nothing hidden, no way out.
 bool isNameInBackup(const fs::path& name) {
     int depth = 0;
@@ -86,15 +90,24 @@ void archiveFiles(SQLite::Database& database, const std::string& root) {
     const auto add = [&](const std::string& name, const Data& bytes) {
         row.reset();
         row.bind(1, name);
-        row.bind(2, static_cast<int>(S_IFREG | (name.ends_with(".key") ? 0600U : 0644U)));
+        row.bind(2, static_cast<int>(S_IFREG | modeOf(name)));
         row.bind(3, now);
         row.bind(4, static_cast<std::int64_t>(bytes.size()));
         row.bind(5, static_cast<const void*>(bytes.data()), static_cast<int>(bytes.size()));
         row.exec();
     };
     add(names.front(), settings);
-    for (const std::string& name : filesOf(root)) {
+    const std::vector<std::string> all = filesOf(root);
+    if (all.size() > kMaximumBackedUpFiles)
+        throw Failure(EX_DATAERR, format("%@ holds more than %zu files", root, kMaximumBackedUpFiles));
+    for (const std::string& name : all) {
         if (name == names.front()) continue;
+        // restore() would refuse it.
+        if (!isNameInBackup(name))
+            throw Failure(EX_DATAERR,
+                          format("%@/%@ has no place in a backup: it is in too many folders, or is "
+                                 "named as the records are",
+                                 root, name));
         const auto bytes = base::readSmallFile(root + "/" + name, kMaximumBackedUpFile);
         if (!bytes) throw Failure(EX_NOINPUT, bytes.error().localizedDescription());
         add(name, *bytes);
@@ -156,7 +169,7 @@ void extractFiles(SQLite::Database& database, const std::string& file, const std
         fs::create_directories(path.parent_path());
         const auto* bytes = static_cast<const std::byte*>(row.getColumn(3).getBlob());
         writeNewFile(path.string(), {bytes, bytes == nullptr ? 0 : static_cast<std::size_t>(size)},
-                     name.ends_with(".key") ? kPrivateFileMode : kPublicFileMode);
+                     modeOf(name));
     }
 }
 

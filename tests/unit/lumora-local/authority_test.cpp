@@ -6,6 +6,7 @@
 
 #include "certificates.h"
 #include "fixed_now.h"
+#include "lumora-local/certificates.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -145,6 +146,68 @@ TEST_F(AuthorityTest, NamesOnlyTheHostsInTheServerCertificate) {
     EXPECT_EQ(X509_check_ip_asc(server_.get(), "::1", 0), 1);
     EXPECT_EQ(X509_check_host(server_.get(), "localhost", 0, 0, nullptr), 0);
     EXPECT_EQ(X509_check_ip_asc(server_.get(), "127.0.0.2", 0), 0);
+}
+
+/// The fault of the chain signer, intermediate, root with these profiles.
+std::optional<std::string> faultOfChain(const CertificateProfile& signer,
+                                        const CertificateProfile& intermediate,
+                                        const CertificateProfile& root) {
+    const IssuedCertificate anchor = issueCertificate(root, nullptr, kNow);
+    const IssuedCertificate between = issueCertificate(intermediate, &anchor, kNow);
+    std::vector<CertificateHandle> chain;
+    chain.push_back(issueCertificate(signer, &between, kNow).certificate);
+    for (const IssuedCertificate* const issued : {&between, &anchor}) {
+        X509_up_ref(issued->certificate.get());
+        chain.emplace_back(issued->certificate.get());
+    }
+    return faultOfSignerChain(chain);
+}
+
+TEST(SignerChain, IsRefusedForTheCertificateAtFault) {
+    const CertificateProfile root{
+        .commonName = "Root", .basicConstraints = "critical,CA:TRUE", .keyUsage = "critical,keyCertSign"};
+    CertificateProfile intermediate = root;
+    intermediate.commonName = "Intermediate";
+    intermediate.markerOid = kTicketIntermediateMarkerOid;
+    const CertificateProfile signer{.commonName = "Signer",
+                                    .basicConstraints = "critical,CA:FALSE",
+                                    .keyUsage = "critical,digitalSignature",
+                                    .markerOid = kTicketSignerMarkerOid};
+    EXPECT_EQ(faultOfChain(signer, intermediate, root), std::nullopt);
+
+    CertificateProfile changed = root;
+    changed.basicConstraints = "critical,CA:FALSE";
+    EXPECT_EQ(faultOfChain(signer, intermediate, changed), "Root may not issue certificates");
+    changed = intermediate;
+    changed.basicConstraints = "critical,CA:FALSE";
+    EXPECT_EQ(faultOfChain(signer, changed, root), "Intermediate may not issue certificates");
+    changed = intermediate;
+    changed.markerOid = kTicketSignerMarkerOid;
+    EXPECT_EQ(faultOfChain(signer, changed, root),
+              "Intermediate lacks the extension 1.2.840.177245.100.6.2.17");
+    changed = signer;
+    changed.markerOid = kServerMarkerOid;
+    EXPECT_EQ(faultOfChain(changed, intermediate, root),
+              "Signer lacks the extension 1.2.840.177245.100.6.1.30");
+}
+
+TEST(SignerChain, IsRefusedUnlessEachCertificateIsIssuedByTheNext) {
+    const auto read = [](const Authority& from, bool ownIntermediate, const Authority& other) {
+        std::vector<CertificateHandle> chain;
+        chain.push_back(certificateFromPem(from.ticketSigner.certificate));
+        chain.push_back(certificateFromPem((ownIntermediate ? from : other).ticketIntermediate.certificate));
+        chain.push_back(certificateFromPem(from.root.certificate));
+        return chain;
+    };
+    const Authority first = createAuthority({"a.example"}, kNow);
+    const Authority second = createAuthority({"a.example"}, kNow);
+    EXPECT_EQ(faultOfSignerChain(read(first, true, second)), std::nullopt);
+    const auto fault = faultOfSignerChain(read(first, false, second));
+    ASSERT_TRUE(fault);
+    EXPECT_NE(fault->find(" is not issued by "), std::string::npos) << *fault;
+    auto two = read(first, true, second);
+    two.pop_back();
+    EXPECT_EQ(faultOfSignerChain(two), "it holds 2 certificates, not signer, intermediate and root");
 }
 
 TEST(Authority, AcceptsTheLongestHostName) {

@@ -10,6 +10,8 @@
 #include "fixed_now.h"
 #include "lumora-local/authority.h"
 #include "lumora-local/failure.h"
+#include "lumora-local/key_file.h"
+#include "lumora-local/signing_key.h"
 #include "support/environment.h"
 #include "support/temporary_directory.h"
 
@@ -34,6 +36,17 @@ int failureOf(Work&& work) {
         return failure.exitStatus();
     }
     return EX_OK;
+}
+
+template <class Work>
+std::string textOfFailure(Work&& work) {
+    try {
+        work();
+    } catch (const Failure& failure) {
+        EXPECT_EQ(failure.exitStatus(), EX_CONFIG) << failure.what();
+        return failure.what();
+    }
+    return "";
 }
 
 Data ticketFrom(const ServiceDirectory& directory) {
@@ -106,6 +119,35 @@ TEST_F(Keys, AreNotMadeWithAnInvalidPassphrase) {
     service.passphraseFile = "credential:../words";
     EXPECT_EQ(failureOf([&] { create(service); }), EX_CONFIG);
     EXPECT_FALSE(std::filesystem::exists(path_));
+}
+
+TEST_F(Keys, AreNotMadeWithAPassphraseFromASpecialFile) {
+    NewService service;
+    std::filesystem::create_directory(parent_ / "folder");
+    ASSERT_EQ(::mkfifo((parent_ / "pipe").c_str(), 0600), 0);
+    for (const char* name : {"folder", "pipe"}) {
+        service.passphraseFile = parent_ / name;
+        EXPECT_EQ(textOfFailure([&] { create(service); }),
+                  "the passphrase file " + service.passphraseFile + " is no regular file");
+    }
+    EXPECT_FALSE(std::filesystem::exists(path_));
+}
+
+TEST_F(Keys, AreNotMadeWithACredentialOutsideOfSystemd) {
+    const ScopedVariable none("CREDENTIALS_DIRECTORY", "");
+    NewService service;
+    service.passphraseFile = "credential:lumora";
+    EXPECT_EQ(textOfFailure([&] { create(service); }),
+              "credential:lumora: there is no CREDENTIALS_DIRECTORY, which systemd sets");
+}
+
+TEST_F(Keys, ForTicketsAreOnP256) {
+    for (const crypto::KeyHandle& key : {crypto::KeyHandle(EVP_EC_gen("P-384")),
+                                         crypto::KeyHandle(EVP_PKEY_Q_keygen(nullptr, nullptr, "ED25519"))}) {
+        writeFile(parent_ / "other.key", encodeKey(key.get(), ""));
+        EXPECT_EQ(textOfFailure([&] { openSigningKey(parent_ / "other.key", ""); }),
+                  "the key in " + (parent_ / "other.key") + " is no EC key on P-256, as tickets need it");
+    }
 }
 
 TEST_F(Keys, AreNotUsedEncryptedWithoutAPassphrase) {

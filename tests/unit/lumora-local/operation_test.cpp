@@ -216,9 +216,26 @@ TEST_F(Backup, OverwritesNothing) {
     EXPECT_EQ(entries, 1U) << "nothing unfinished is left";
 }
 
+TEST_F(Backup, IsNotMadeIfItCouldNotBeRestored) {
+    RunningService service;
+    for (const char* name : {"service/a/b/c/deep.pem", "service/old/records.sqlite-copy"}) {
+        const std::filesystem::path path = std::filesystem::path(service.path()) / name;
+        std::filesystem::create_directories(path.parent_path());
+        writeFile(path, "text");
+        const Outcome outcome = runProgram({"backup", service.path(), file()});
+        expectFailure(outcome, 65);
+        EXPECT_NE(outcome.err.find(std::string(name) + " has no place in a backup"), std::string::npos)
+            << outcome.err;
+        EXPECT_FALSE(std::filesystem::exists(file()));
+        std::filesystem::remove(path);
+    }
+    EXPECT_EQ(runProgram({"backup", service.path(), file()}).exitStatus, 0);
+}
+
 TEST_F(Backup, IsRefusedUnlessItIsWholeAndHarmless) {
     RunningService service;
     expectFailure(runProgram({"restore", directory_ / "absent", restored()}), 66);
+    expectFailure(runProgram({"restore", directory_.path(), restored()}), 66);
     writeFile(file(), "no database");
     expectFailure(runProgram({"restore", file(), restored()}), 65);
     std::filesystem::copy_file(service.directory().storePath(), directory_ / "records");

@@ -39,6 +39,18 @@ TEST(Samples, AreNotWrittenWhenAnyOfThemExists) {
     }
 }
 
+TEST(Samples, NameADirectoryThatCannotBeMade) {
+    const TemporaryDirectory directory;
+    writeFile(directory / "file", "mine");
+    try {
+        writeSamples(directory / "file/samples", kNow);
+        FAIL() << "a directory below a file";
+    } catch (const Failure& failure) {
+        EXPECT_EQ(failure.exitStatus(), EX_CANTCREAT);
+        EXPECT_EQ(failure.what(), "cannot create " + (directory / "file/samples") + ": Not a directory");
+    }
+}
+
 TEST(Samples, AreNotWrittenOverADanglingLink) {
     const TemporaryDirectory directory;
     std::filesystem::create_symlink(directory / "elsewhere", directory / "Sample.dmg");

@@ -60,6 +60,36 @@ TEST(ServiceSettings, NameTheFileAndTheUnknownKey) {
               "/site/service/service.json: unknown key \"server.chain\"");
 }
 
+TEST(ServiceSettings, NameTheMemberAndItsFault) {
+    const std::pair<const char*, const char*> faults[] = {
+        {R"({"hosts":"a"})", R"("hosts" is not an array)"},
+        {R"({"hosts":[""]})", R"("hosts" holds what is not a text)"},
+        {R"({"hosts":["a b"]})", R"("hosts": "a b" is not a host)"},
+        {R"({"hosts":["a"],"log":"xml"})", R"("log" is neither text nor json)"},
+        {R"({"hosts":["a"],"role":"full"})", R"("role" is full; it can be "lookup" or absent)"},
+        {R"({"hosts":["a"],"store":"mysql://"})", R"("store" is not a URL that begins with postgresql://)"},
+        {R"({"hosts":["a"],"store":7})", R"("store" is not a URL that begins with postgresql://)"},
+        {R"({"hosts":["a"],"signer":{"key":"k"}})",
+         R"("signer" needs a "key" and a "chain" of three certificates)"},
+        {R"({"hosts":["a"],"server":{"key":"k"}})", R"("server" needs a "key" and a "certificate")"},
+        {R"({"hosts":["a"],"admin":{"clients":"c.pem"}})", R"("admin.listen" is not ADDRESS:PORT)"},
+        {R"({"hosts":["a"],"admin":{"listen":"127.0.0.1:x","clients":"c.pem"}})",
+         R"("admin.listen" is not ADDRESS:PORT)"},
+        {R"({"hosts":["a"],"admin":{"listen":"127.0.0.1:8444"}})", R"("admin.clients" is missing)"},
+    };
+    for (const auto& [text, complaint] : faults)
+        EXPECT_EQ(complaintAbout(text), "/site/service/service.json: " + std::string(complaint));
+    EXPECT_EQ(complaintAbout(R"({"hosts":[]})"), "/site/service/service.json names no hosts");
+}
+
+TEST(ServiceSettings, HaveAnAdminListenerWithADefaultPort) {
+    const auto settings =
+        parseText(R"({"hosts":["a"],"admin":{"listen":"127.0.0.1","clients":"clients/ca.pem"}})");
+    ASSERT_TRUE(settings.admin);
+    EXPECT_EQ(settings.admin->listen.port, kDefaultAdminPort);
+    EXPECT_EQ(settings.admin->clientAuthorities, "/site/service/clients/ca.pem");
+}
+
 TEST(ServiceSettings, AreRefusedIfInvalid) {
     for (const char* text : {
              R"([])",
