@@ -72,7 +72,7 @@ bool Case::open() {
     file_ = std::move(opened.file);
     kind_ = opened.kind;
     absolutePath_ = url.path();
-    result_.kind = verify::nameOf(kind_);
+    result_.kind = nameOf(kind_);
     return true;
 }
 

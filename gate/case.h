@@ -67,7 +67,7 @@ class Case {
     const Judgement& judgement_;
     Result result_;
     std::shared_ptr<PWHashedFile> file_;
-    verify::Kind kind_ = verify::Kind::bundle;
+    verify::Kind kind_ = verify::Kind::none;
     std::string absolutePath_;
     std::optional<base::Data> codeHash_;
     std::optional<TicketPlaceFault> placeFault_;

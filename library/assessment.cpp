@@ -27,6 +27,8 @@ const char* const kStapledPlace = "stapled ticket";
 
 pinwell_kind numberOf(Kind kind) {
     switch (kind) {
+        case Kind::none:
+            return PINWELL_KIND_NONE;
         case Kind::bundle:
             return PINWELL_KIND_BUNDLE;
         case Kind::executable:
@@ -192,7 +194,7 @@ class Assessor {
     const LocalPlatform platform_;
     const Platform services_;
     std::shared_ptr<PWHashedFile> file_;
-    Kind kind_ = Kind::bundle;
+    Kind kind_ = Kind::none;
     std::optional<TicketPlaceFault> placeFault_;
     std::optional<verify::JudgedTicket> judged_;
     verify::Section checks_;
@@ -245,6 +247,7 @@ LocatedTicket findTicket(const std::string& path) {
     const URL url = URL::fileURLWithPath(path);
     const verify::OpenedArtefact artefact = opened(url, services);
     switch (artefact.kind) {
+        case Kind::none:
         case Kind::bundle:
         case Kind::executable:
             break;

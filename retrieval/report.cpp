@@ -74,20 +74,6 @@ int worseStatus(int first, int second) noexcept {
     return weightOf(second) > weightOf(first) ? second : first;
 }
 
-std::string_view nameOf(Kind kind) noexcept {
-    switch (kind) {
-        case Kind::none:
-            return "";
-        case Kind::bundle:
-            return "bundle";
-        case Kind::diskImage:
-            return "diskImage";
-        case Kind::package:
-            return "package";
-    }
-    return "";
-}
-
 namespace {
 
 using Json = nlohmann::ordered_json;

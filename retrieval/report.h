@@ -8,6 +8,8 @@
 #include <string_view>
 #include <vector>
 
+#include "src/PWHashedFile/file_kind.h"
+
 namespace pinwell::retrieval {
 
 /// Why an artefact or a record ended with its result: a closed list, for programs.
@@ -50,11 +52,8 @@ struct Outcome {
     Cause cause = Cause::worked;
 };
 
-/// The kind of an artefact; `none` if not yet known, or unsupported.
-enum class Kind : std::uint8_t { none, bundle, diskImage, package };
-
-/// "bundle", "diskImage", "package"; empty for `none`.
-std::string_view nameOf(Kind kind) noexcept;
+/// An executable outside a bundle counts as a bundle, as in the tool.
+using Kind = ArtefactKind;
 
 struct Report {
     std::string path;            // as given; empty for a record without an artefact

@@ -31,17 +31,17 @@ bool isExecutableImage(const std::string& path) {
     }
 }
 
-/// The tool's kind; `nullopt` for a path that it refuses, or accepts only as a fallback.
-std::optional<Kind> kindOf(const PWHashedFile& file, bool isFile, const std::string& path) {
+/// The tool's kind; `none` for a path that it refuses, or accepts only as a fallback.
+Kind kindOf(const PWHashedFile& file, bool isFile, const std::string& path) {
     if (dynamic_cast<const PWHashedDiskImage*>(&file) != nullptr && isFile) return Kind::diskImage;
     if (dynamic_cast<const PWHashedFlatPackage*>(&file) != nullptr && isFile) return Kind::package;
-    if (dynamic_cast<const PWHashedBundle*>(&file) == nullptr) return std::nullopt;
+    if (dynamic_cast<const PWHashedBundle*>(&file) == nullptr) return Kind::none;
     if (!isFile) return Kind::bundle;
-    return isExecutableImage(path) ? std::optional(Kind::executable) : std::nullopt;
+    return isExecutableImage(path) ? Kind::executable : Kind::none;
 }
 
 OpenedArtefact refused(std::string problem) {
-    return {nullptr, Kind::bundle, std::move(problem)};
+    return {nullptr, Kind::none, std::move(problem)};
 }
 
 VerifiedCode verified(const Subject& subject, Workers& workers, Section& root) {
@@ -53,6 +53,7 @@ VerifiedCode verified(const Subject& subject, Workers& workers, Section& root) {
                                     workers, root);
         case Kind::diskImage:
             return verifyDiskImage(codesign::openCode(base::Places(), subject.path), workers, root);
+        case Kind::none:
         case Kind::package:
             break;
     }
@@ -60,20 +61,6 @@ VerifiedCode verified(const Subject& subject, Workers& workers, Section& root) {
 }
 
 }  // namespace
-
-std::string_view nameOf(Kind kind) {
-    switch (kind) {
-        case Kind::bundle:
-            return "bundle";
-        case Kind::executable:
-            return "executable";
-        case Kind::diskImage:
-            return "diskImage";
-        case Kind::package:
-            break;
-    }
-    return "package";
-}
 
 OpenedArtefact openArtefact(const values::URL& url, const Platform& platform) {
     const auto properties = platform.files.resourceProperties(url);
@@ -85,11 +72,11 @@ OpenedArtefact openArtefact(const values::URL& url, const Platform& platform) {
             return refused("The file cannot be read: " + reasonOf(opened.error()) + ".");
     }
     std::shared_ptr<PWHashedFile> file = PWHashedFile::initWithFileURL(url, platform);
-    const auto kind = file ? kindOf(*file, isFile, url.path()) : std::nullopt;
-    if (!kind && properties->isSymbolicLink)
+    const Kind kind = file ? kindOf(*file, isFile, url.path()) : Kind::none;
+    if (kind == Kind::none && properties->isSymbolicLink)
         return refused("This is a symbolic link; what it leads to must be named.");
-    if (!kind) return refused("This is of no kind that carries a ticket.");
-    return {std::move(file), *kind, {}};
+    if (kind == Kind::none) return refused("This is of no kind that carries a ticket.");
+    return {std::move(file), kind, {}};
 }
 
 Report verifyArtefact(const Subject& subject, Workers& workers) {

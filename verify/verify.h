@@ -24,16 +24,13 @@
 
 namespace pinwell::verify {
 
-enum class Kind { bundle, executable, diskImage, package };
-
-/// "bundle", "executable", "diskImage", "package".
-std::string_view nameOf(Kind kind);
+using Kind = ArtefactKind;
 
 /// An opened artefact, or the reason why it was not opened. `file` is null if the path cannot be read or is
 /// of a kind without tickets: the sentence in `problem` says which.
 struct OpenedArtefact {
     std::shared_ptr<PWHashedFile> file;
-    Kind kind = Kind::bundle;
+    Kind kind = Kind::none;
     std::string problem;
 };
 
@@ -42,8 +39,9 @@ struct OpenedArtefact {
 /// functions must be silent.
 OpenedArtefact openArtefact(const values::URL& url, const Platform& platform);
 
+/// Of every kind except `none`.
 struct Subject {
-    Kind kind = Kind::bundle;
+    Kind kind = Kind::none;
     std::string path;
 };
 

@@ -76,4 +76,20 @@ AssessmentClass assessmentClassForUTI(types::TypeService& types, const std::opti
     return listed ? AssessmentClass::bundle : AssessmentClass::unknown;
 }
 
+std::string_view nameOf(ArtefactKind kind) noexcept {
+    switch (kind) {
+        case ArtefactKind::none:
+            break;
+        case ArtefactKind::bundle:
+            return "bundle";
+        case ArtefactKind::executable:
+            return "executable";
+        case ArtefactKind::diskImage:
+            return "diskImage";
+        case ArtefactKind::package:
+            return "package";
+    }
+    return "";
+}
+
 }  // namespace pinwell

@@ -33,4 +33,16 @@ bool itemConformsToUTI(types::TypeService& types, const std::optional<std::strin
 AssessmentClass assessmentClassForUTI(types::TypeService& types, const std::optional<std::string>& identifier,
                                       std::string_view extension);
 
+/// The kind of an artefact in the reports of the companions and the library.
+enum class ArtefactKind : std::uint8_t {
+    none,  // not known yet, or without tickets
+    bundle,
+    executable,  // outside a bundle
+    diskImage,
+    package,
+};
+
+/// "bundle", "executable", "diskImage", "package"; empty for `none`.
+std::string_view nameOf(ArtefactKind kind) noexcept;
+
 }  // namespace pinwell
