@@ -6,8 +6,6 @@
 
 #include <algorithm>
 #include <chrono>
-#include <csignal>
-#include <exception>
 #include <optional>
 #include <string>
 #include <utility>
@@ -19,7 +17,6 @@
 #include "batch/settings.h"
 #include "companion/process.h"
 #include "companion/streams.h"
-#include "runtime/process.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"
@@ -264,17 +261,10 @@ int runBatch(const Settings& settings, const base::FileDescriptor& signals) {
 int main(int argc, char** argv) {
     // With a heap for each thread, memory would grow with --jobs.
     mallopt(M_ARENA_MAX, kMostArenas);
-    runtime::occupyStandardStreams();
-    // A closed pipe, and a file that would exceed the caller's limit, become failed writes.
-    std::signal(SIGPIPE, SIG_IGN);
-    std::signal(SIGXFSZ, SIG_IGN);
-    try {
+    return companion::runMain(kProgramName, [&] {
         const CommandLine line = readCommandLine(argc, argv);
         if (line.exitStatus) return *line.exitStatus;
         const base::FileDescriptor signals = companion::takeEndingSignals();
         return runBatch(line.settings, signals);
-    } catch (const std::exception& error) {
-        complain(error.what());
-        return EX_SOFTWARE;
-    }
+    });
 }

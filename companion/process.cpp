@@ -3,6 +3,7 @@
 #include <poll.h>
 #include <sys/eventfd.h>
 #include <sys/signalfd.h>
+#include <sysexits.h>
 #include <unistd.h>
 
 #include <array>
@@ -14,6 +15,7 @@
 #include <system_error>
 #include <utility>
 
+#include "companion/command_line.h"
 #include "runtime/process.h"
 
 namespace pinwell::companion {
@@ -25,6 +27,18 @@ base::FileDescriptor owned(int number, const char* call) {
 }
 
 }  // namespace
+
+int runMain(std::string_view program, const std::function<int()>& run) {
+    runtime::occupyStandardStreams();
+    std::signal(SIGPIPE, SIG_IGN);
+    std::signal(SIGXFSZ, SIG_IGN);
+    try {
+        return run();
+    } catch (const std::exception& error) {
+        complain(program, error.what());
+        return EX_SOFTWARE;
+    }
+}
 
 base::FileDescriptor takeEndingSignals() {
     sigset_t ending;

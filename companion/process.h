@@ -1,15 +1,21 @@
-// The process of a run: the signals that end it, and its temporary directory.
+// The process of a run: its main, the signals that end it, and its temporary directory.
 #pragma once
 
 #include <functional>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <thread>
 
 #include "base/error.h"
 #include "base/handle.h"
 
 namespace pinwell::companion {
+
+/// The main of a companion: calls `run` and returns its exit status. Before that, it opens missing standard
+/// streams, and makes failed writes of a closed pipe and of a file over the caller's limit (RLIMIT_FSIZE). An
+/// exception becomes a line on standard error and EX_SOFTWARE.
+int runMain(std::string_view program, const std::function<int()>& run);
 
 /// The exit status after a signal is this plus its number.
 inline constexpr int kSignalBase = 128;
@@ -38,8 +44,7 @@ class SignalWatch {
 };
 
 /// A directory of mode 0700 in the user's temporary directory, which becomes the process's temporary
-/// directory
-/// ($TMPDIR): all files of a run can be removed with it. Make it before there is a second thread.
+/// directory ($TMPDIR): all files of a run can be removed with it. Make it before there is a second thread.
 class OwnTemporaryDirectory {
   public:
     /// `name` begins the directory's name.

@@ -3,8 +3,6 @@
 
 #include <CLI/CLI.hpp>
 #include <chrono>
-#include <csignal>
-#include <exception>
 #include <filesystem>
 #include <map>
 #include <optional>
@@ -13,12 +11,12 @@
 
 #include "base/error.h"
 #include "companion/command_line.h"
+#include "companion/process.h"
 #include "gate/find.h"
 #include "gate/policy.h"
 #include "gate/render.h"
 #include "gate/report_file.h"
 #include "gate/run.h"
-#include "runtime/process.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"
@@ -30,8 +28,10 @@ namespace {
 using namespace pinwell;
 using namespace pinwell::gate;
 
+constexpr std::string_view kProgramName = "pinwell-gate";
+
 void complain(std::string_view text) {
-    companion::complain("pinwell-gate", text);
+    companion::complain(kProgramName, text);
 }
 
 /// Policy options of the command line, which override those of a file.
@@ -232,8 +232,8 @@ int run(int argc, char** argv) {
     Options options;
     PolicyArguments policy;
     CLI::App app("Judges software that was received: its ticket, and every byte that was signed.",
-                 "pinwell-gate");
-    app.set_version_flag("--version", companion::versionText("pinwell-gate"));
+                 std::string(kProgramName));
+    app.set_version_flag("--version", companion::versionText(kProgramName));
     addOptions(app, options, policy);
     try {
         app.parse(argc, argv);
@@ -256,13 +256,5 @@ int run(int argc, char** argv) {
 }  // namespace
 
 int main(int argc, char** argv) {
-    runtime::occupyStandardStreams();
-    // A closed pipe becomes a failed write.
-    std::signal(SIGPIPE, SIG_IGN);
-    try {
-        return run(argc, argv);
-    } catch (const std::exception& error) {
-        complain(error.what());
-        return EX_SOFTWARE;
-    }
+    return companion::runMain(kProgramName, [&] { return run(argc, argv); });
 }

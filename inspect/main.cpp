@@ -5,18 +5,16 @@
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <atomic>
-#include <csignal>
 #include <cstdint>
-#include <exception>
 #include <string>
 #include <vector>
 
 #include "companion/command_line.h"
+#include "companion/process.h"
 #include "companion/streams.h"
 #include "inspect/gather.h"
 #include "inspect/render_json.h"
 #include "inspect/render_text.h"
-#include "runtime/process.h"
 #include "runtime/signals.h"
 #include "sandbox/sandbox.h"
 #include "src/confinement.h"
@@ -33,8 +31,10 @@ struct Arguments {
     companion::ColorWhen color = companion::ColorWhen::automatic;
 };
 
+constexpr std::string_view kProgramName = "pinwell-inspect";
+
 void complain(std::string_view text) {
-    companion::complain("pinwell-inspect", text);
+    companion::complain(kProgramName, text);
 }
 
 /// After this, the process only reads the given paths: it writes nothing, starts nothing and connects to
@@ -88,8 +88,8 @@ int run(int argc, char** argv) {
     CLI::App app(
         "Shows everything about an artefact that bears on its ticket: the code signature, where the "
         "ticket sits, what it says, and whether it is good. Changes nothing and uses no network.",
-        "pinwell-inspect");
-    app.set_version_flag("--version", companion::versionText("pinwell-inspect"));
+        std::string(kProgramName));
+    app.set_version_flag("--version", companion::versionText(kProgramName));
     std::string color = "auto";
     app.add_option("--color", color, "Colour the text: auto, always or never")
         ->check(CLI::IsMember({"auto", "always", "never"}))
@@ -116,13 +116,5 @@ int run(int argc, char** argv) {
 }  // namespace
 
 int main(int argc, char** argv) {
-    runtime::occupyStandardStreams();
-    // A closed pipe becomes a failed write.
-    std::signal(SIGPIPE, SIG_IGN);
-    try {
-        return run(argc, argv);
-    } catch (const std::exception& error) {
-        complain(error.what());
-        return EX_SOFTWARE;
-    }
+    return companion::runMain(kProgramName, [&] { return run(argc, argv); });
 }

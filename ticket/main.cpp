@@ -2,8 +2,6 @@
 #include <malloc.h>
 #include <sysexits.h>
 
-#include <csignal>
-#include <exception>
 #include <memory>
 #include <optional>
 #include <string>
@@ -12,10 +10,10 @@
 
 #include "base/text.h"
 #include "companion/command_line.h"
+#include "companion/process.h"
 #include "crypto/crypto.h"
 #include "https/session.h"
 #include "retrieval/ticket_request.h"
-#include "runtime/process.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"
@@ -218,14 +216,5 @@ int run(int argc, char** argv) {
 int main(int argc, char** argv) {
     mallopt(M_ARENA_MAX, 1);
     crypto::wipeWhatOpenSSLFrees();
-    runtime::occupyStandardStreams();
-    // A closed pipe, and a file that would exceed the caller's limit, become failed writes.
-    std::signal(SIGPIPE, SIG_IGN);
-    std::signal(SIGXFSZ, SIG_IGN);
-    try {
-        return run(argc, argv);
-    } catch (const std::exception& error) {
-        companion::complain(kProgramName, error.what());
-        return EX_SOFTWARE;
-    }
+    return companion::runMain(kProgramName, [&] { return run(argc, argv); });
 }

@@ -266,6 +266,15 @@ TEST_F(GateReport, ThatCannotBeWrittenEndsWith74) {
     EXPECT_EQ(gate({"--offline", "--attest", "/dev/full", image()}).exitStatus, 74);
 }
 
+TEST_F(GateReport, OverTheCallersLimitOfAFileEndsWith74) {
+    Command limited = gateCommand({"-c", "ulimit -f 0; exec \"$0\" \"$@\"", PINWELL_GATE_PROGRAM, "--offline",
+                                   "-o", directory / "report", image()});
+    limited.executable = "/bin/bash";
+    const ProcessResult result = runProcess(limited);
+    EXPECT_EQ(result.exitStatus, 74);
+    EXPECT_THAT(result.errors, HasSubstr("cannot write to " + (directory / "report")));
+}
+
 // As with the other companions: a reader that closes the pipe gets no message, and the verdict stays.
 TEST_F(GateReport, MayLoseItsReader) {
     flip(image(), 0);
