@@ -40,7 +40,7 @@ class Coordinator {
         /// Whether to work on the artefact at this path; false if it belongs to another part, or was named
         /// before.
         std::function<bool(const std::string& path)> isWanted;
-        /// `filesState` is as ArtefactRun has it; empty if the artefact was not begun.
+        /// `filesState` is that of ArtefactRun; empty if the artefact was not begun.
         std::function<void(const Report& report, const std::string& filesState)> ended;
         /// Whether an earlier run has already done this artefact. On a worker's thread.
         std::function<bool(const std::string& path, const retrieval::ArtefactRun& run)> isDoneBefore;

@@ -36,7 +36,7 @@ struct Summary {
 /// "staple" or "validate".
 std::string_view nameOfOperation(std::uint8_t operation) noexcept;
 
-/// One line of JSON, without its newline, as docs/batch.schema.json has it.
+/// One line of JSON, without its newline, in the form of docs/batch.schema.json.
 std::string asJson(const Summary& summary);
 
 /// One line, without its newline.

@@ -72,7 +72,7 @@ struct Parsed {
 /// Reads the line. `arguments` of the result holds everything except the options, byte for byte.
 Parsed parseCommand(const Program& program, int argc, char** argv);
 
-// Values. The reason of an error is the fault of the text, as TakeOption has it.
+// Values. The reason of an error is the fault of the text, as in TakeOption.
 
 /// A whole number between the two bounds.
 base::Result<std::uint64_t> readCount(std::string_view text, std::uint64_t lowest, std::uint64_t highest);

@@ -145,7 +145,7 @@ inline constexpr std::int64_t kTicketMinimumEllipticCurveBits = 256;
 /// All of satchel_verify_signature, status and all.
 trust::Status verifySatchel(const satchel_view* view, trust::TrustService& service);
 
-/// The elements of the certificate block, as views of it, before the first that breaks a rule.
+/// The elements of the certificate block up to the first that breaks a rule, as views of the block.
 struct SatchelCertificateBlock {
     std::array<base::ByteView, kSatchelMaximumCertificates> elements;
     std::size_t count = 0;

@@ -1,4 +1,5 @@
-// The parts that this build leaves out. Their commands and options are there, and say so.
+// The parts that this build leaves out. Their commands and options exist, and fail with a message that names
+// the missing part.
 #include "lumora-local/failure.h"
 #include "lumora-local/metrics.h"
 #include "lumora-local/signing_key.h"

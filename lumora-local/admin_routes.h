@@ -47,7 +47,7 @@ RevocationRequest parseRevocationRequest(std::string_view body);
 /// The record and the set that a body names, as far as they can be read; for the log.
 RefusedAttempt attemptIn(std::string_view body);
 
-/// The key in the header Idempotency-Key, without its quotes. Throws Refused (400) if it is none.
+/// The key in the header Idempotency-Key, without its quotes. Throws Refused (400) if it is not a key.
 std::string parseIdempotencyKey(std::string_view header);
 
 /// The number of records or events on a page.

@@ -80,7 +80,7 @@ void archiveFiles(SQLite::Database& database, const std::string& root) {
     database.exec("CREATE TABLE sqlar (name TEXT PRIMARY KEY, mode INT, mtime INT, sz INT, data BLOB)");
     SQLite::Statement row(database, "INSERT INTO sqlar VALUES (?, ?, ?, ?, ?)");
     const std::int64_t now = values::Date::now().seconds;
-    // service.json first: the files that it names are there before it, and stay.
+    // service.json is read first. The files that it names exist before it, and no command removes them.
     std::vector<std::string> names{"service/service.json"};
     const Data settings = [&] {
         auto bytes = base::readSmallFile(root + "/" + names.front(), kMaximumBackedUpFile);

@@ -146,7 +146,7 @@ std::string requestCertificate(const CertificateProfile& profile, EVP_PKEY* key)
     const auto add = [&](ExtensionHandle extension) {
         require(extension != nullptr && sk_X509_EXTENSION_push(extensions.get(), extension.get()) > 0,
                 "add an extension to a certificate request");
-        static_cast<void>(extension.release());  // the list has it
+        static_cast<void>(extension.release());  // the list owns it
     };
     X509V3_CTX context;
     X509V3_set_ctx_nodb(&context);

@@ -29,7 +29,7 @@ class ConnectionTable {
     /// and enters nothing.
     Identifier enter(const std::string& address, std::function<void()> close);
 
-    /// The first bytes of a request are here.
+    /// The first bytes of a request have arrived.
     void becomeWaiting(Identifier connection);
 
     /// The request is whole.

@@ -148,7 +148,7 @@ std::string encodeKey(EVP_PKEY* key, std::string_view passphrase) {
         const EncryptedKeyHandle encrypted(PKCS8_set0_pbe(
             passphrase.data(), static_cast<int>(passphrase.size()), plain.get(), algorithm.get()));
         require(encrypted != nullptr, "encrypt a key");
-        static_cast<void>(algorithm.release());  // the encrypted key has it
+        static_cast<void>(algorithm.release());  // the encrypted key owns it
         require(PEM_write_bio_PKCS8(pem.get(), encrypted.get()) == 1, "encrypt a key");
     }
     return textOf(pem.get());

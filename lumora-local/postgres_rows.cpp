@@ -216,7 +216,7 @@ bool canNameARecord(std::string_view name) {
 
 namespace {
 
-static_assert(kSearchedLabelBytes == 64);  // as the index record_by_label has it
+static_assert(kSearchedLabelBytes == 64);  // the same number as in the index record_by_label
 
 std::vector<FoundRecord> foundIn(const PostgresRows& rows) {
     std::vector<FoundRecord> found;

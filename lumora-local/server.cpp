@@ -148,7 +148,7 @@ class DescriptorWatch {
 };
 
 std::size_t workersFor(const ServerLimits& limits) {
-    constexpr std::size_t kFewest = 4;  // one that waits for the records leaves others
+    constexpr std::size_t kFewest = 4;  // while some wait for the records, others serve
     if (limits.workers > 0) return limits.workers;
     return std::max<std::size_t>(kFewest, std::thread::hardware_concurrency());
 }

@@ -48,7 +48,7 @@ class ServiceCounts {
         Number recordsFromMemory{};  // of the known ones, those read without the store
         Number connectionsAccepted{};
         Number connectionsClosed{};
-        Number connectionsRefused{};  // of peers with too many
+        Number connectionsRefused{};  // of peers that have too many
         Number handshakesFailed{};
         Number storeFailures{};  // requests that failed because of the store
     };

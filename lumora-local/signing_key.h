@@ -34,7 +34,7 @@ class SigningKey {
 
 /// `key` is a PEM file, opened with the passphrase at `passphraseFile` if it is encrypted, or a pkcs11: URI.
 /// For a URI the calling process must have one thread. Throws Failure: EX_NOINPUT if a file cannot be read,
-/// EX_CONFIG if there is no such key, or it is none on P-256.
+/// EX_CONFIG if there is no such key, or it is not on P-256.
 std::unique_ptr<SigningKey> openSigningKey(const std::string& key, const std::string& passphraseFile);
 
 /// A key on P-256 in the process that uses the token. One thread at a time.

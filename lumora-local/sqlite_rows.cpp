@@ -126,7 +126,7 @@ const std::string kByHash = kColumns +
                             "(SELECT DISTINCT name FROM hash WHERE environment = ?1 AND hash = ?4"
                             " AND name >= ?3 ORDER BY name LIMIT ?2) h"
                             " JOIN record r ON r.environment = ?1 AND r.name = h.name ORDER BY r.name";
-// As the index record_by_label has it.
+// The same expression as in the index record_by_label.
 const std::string kLabelKey = "substr(CAST(r.label AS BLOB), 1, 64)";
 const std::string kByLabel = kColumns + "record r WHERE r.environment = ?1 AND " + kLabelKey + " < ?5 AND (" +
                              kLabelKey + ", r.name) > (?4, ?3) ORDER BY " + kLabelKey + ", r.name LIMIT ?2";

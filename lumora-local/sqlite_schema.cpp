@@ -42,8 +42,8 @@ constexpr const char* kRecordTables = R"(
     );
 )";
 
-// The number of records: counting ten million takes seconds. A store of version 2 may have it already.
-// Programs that do not know it also count, because the triggers belong to the database.
+// The number of records, because counting ten million takes seconds. A store of version 2 may have this
+// table already. Earlier programs keep the number right too, because the triggers belong to the database.
 constexpr const char* kRecordCount = R"(
     CREATE TABLE record_count (records INTEGER NOT NULL);
     INSERT INTO record_count (records) SELECT count(*) FROM record;

@@ -44,8 +44,8 @@ class TlsContext {
     /// The context for new connections. A connection keeps its first context.
     std::shared_ptr<boost::asio::ssl::context> current() const;
 
-    /// Reads these files, or the same ones again. Throws Failure if they cannot be used; current() stays as
-    /// it was then.
+    /// Reads these files, or the same ones again. Throws Failure if they cannot be used; then current() is
+    /// unchanged.
     void reload(const TlsFiles& files);
     void reload() { reload(files_); }
 

@@ -46,7 +46,7 @@ RotationReport rotateSigner(const ServiceDirectory& directory, const SignerRotat
                             values::Date now);
 
 /// Gives the server a new key and certificate for the hosts of service.json. `rootDirectory` has root.key; if
-/// empty, the service has it. Throws Failure.
+/// empty, root.key is in the service's directory. Throws Failure.
 RotationReport rotateServer(const ServiceDirectory& directory, const std::string& rootDirectory,
                             values::Date now);
 

@@ -74,7 +74,7 @@ struct Report {
     std::optional<std::string> event{};
 };
 
-/// One line of JSON, without its newline, as docs/batch.schema.json and docs/ticket.schema.json have it.
+/// One line of JSON, without its newline, in the form of docs/batch.schema.json and docs/ticket.schema.json.
 /// Bytes outside UTF-8 become U+FFFD.
 std::string asJson(const Report& report);
 

@@ -40,8 +40,8 @@ struct RetryPolicy {
 /// From 0 to 1, from any thread.
 double randomChance();
 
-/// Whether a response of this status asks for a later retry: the ones of a gateway or an overloaded service
-/// (429, 502, 503, 504). They say nothing about the request.
+/// Whether a response of this status asks for a later retry. These are the statuses of a gateway or an
+/// overloaded service (429, 502, 503, 504). They say nothing about the request.
 bool isBusyStatus(int status);
 
 /// The delay that the response asks for (RFC 9110, section 10.2.3); `nullopt` if it names none.

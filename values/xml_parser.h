@@ -54,7 +54,7 @@ class XMLAttributes {
     const char* const* words_;
 };
 
-/// The parts of a document, in its order. An exception of an event ends the parse and leaves it.
+/// The parts of a document, in its order. An exception of an event ends the parse and passes through it.
 class XMLEvents {
   public:
     virtual ~XMLEvents() = default;

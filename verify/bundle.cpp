@@ -23,8 +23,8 @@ namespace {
 const std::string kInformation = "Info.plist";
 const std::string kResources = "Resources";
 
-// An entry of any kind. The system that runs the software follows a link here, so a link is a fault, not a
-// reason to search for the list elsewhere.
+// The path of the property list, whatever kind of entry is there. A system follows a link at this place, so
+// a link is a fault: the search does not go on elsewhere.
 std::string propertyListOf(const BundleLayout& layout) {
     switch (layout.kind) {
         case BundleLayout::Kind::application:

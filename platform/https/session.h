@@ -88,7 +88,7 @@ std::string localizedStringForStatusCode(int status);
 /// The kind of a challenge.
 enum class AuthenticationMethod { serverTrust, clientCertificate, password };
 
-/// A question of the connection to the delegate.
+/// A question that a connection asks the delegate.
 struct AuthenticationChallenge {
     std::string host;  // as in the URL, without port or brackets
     AuthenticationMethod method = AuthenticationMethod::serverTrust;
@@ -219,7 +219,7 @@ struct SessionOptions {
     /// is not judged again then.
     bool keepsConnection = false;
 
-    /// The maximum time without an exchange, and in all.
+    /// The maximum time of a kept connection without an exchange, and its maximum age.
     std::chrono::seconds keepsIdleConnectionFor{60};
     std::chrono::seconds keepsConnectionFor{300};
 

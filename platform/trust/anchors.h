@@ -49,8 +49,8 @@ class DenyList {
 
     void add(const X509CertificateRef& certificate);
 
-    /// Adds a certificate that X509Certificate::parse refuses, because it may contain the key of an accepted
-    /// one. Returns false, and adds nothing, if its signed part or its key cannot be found.
+    /// Adds a certificate although X509Certificate::parse refuses it: an accepted certificate may have the
+    /// same key. Returns false, and adds nothing, if its signed part or its key cannot be found.
     bool addUnreadable(ByteView der);
 
     /// Whether the certificate has the same contents as one on the list (tbsCertificate, RFC 5280, 4.1.1.1),

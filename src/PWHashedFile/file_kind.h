@@ -25,7 +25,7 @@ enum class AssessmentClass : std::int32_t {
     unknown = 3,  // the directory test decides
 };
 
-/// Whether the type is one of the set or conforms to one; never for a missing type or an empty set.
+/// Whether the type is in the set, or conforms to a type in it. False for a missing type or an empty set.
 bool itemConformsToUTI(types::TypeService& types, const std::optional<std::string>& identifier,
                        std::span<const std::string_view> set);
 
