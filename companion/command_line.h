@@ -28,7 +28,6 @@
 
 namespace CLI {
 class App;
-class ParseError;
 }  // namespace CLI
 
 namespace pinwell::companion {
@@ -127,10 +126,10 @@ void complain(std::string_view program, std::string_view text);
 /// The word most similar to `word`; empty if none is similar.
 std::string_view nearestWord(std::string_view word, std::span<const std::string_view> words);
 
-/// Describes the fault of a command line that CLI11 refused: the library's error, or for an unknown command
-/// or option its name and the nearest existing one. One line, without its end; control characters are
-/// escaped.
-std::string describe(const CLI::App& app, const CLI::ParseError& error);
+/// Reads the line of a program that uses CLI11. Returns the exit status if the process must end: after the
+/// help or the version, or after an error. The error is one line on standard error: the library's text, or
+/// for an unknown command or option its name and the nearest existing one.
+std::optional<int> parseLine(CLI::App& app, int argc, char** argv);
 
 /// "PROGRAM 34.0 (commit 0123456789ab, OpenSSL 3.0.17, curl 7.88.1)": the libraries are the loaded ones.
 /// Without a line end.

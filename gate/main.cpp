@@ -235,14 +235,7 @@ int run(int argc, char** argv) {
                  std::string(kProgramName));
     app.set_version_flag("--version", companion::versionText(kProgramName));
     addOptions(app, options, policy);
-    try {
-        app.parse(argc, argv);
-    } catch (const CLI::Success& request) {
-        return app.exit(request);  // help, version
-    } catch (const CLI::ParseError& error) {
-        complain(companion::describe(app, error));
-        return EX_USAGE;
-    }
+    if (const auto status = companion::parseLine(app, argc, argv)) return *status;
     if (options.output == "-") options.output.clear();
     base::Result<Policy> combined = policy.combined();
     if (!combined) {

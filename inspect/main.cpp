@@ -101,14 +101,7 @@ int run(int argc, char** argv) {
         "Exit status: 0 every ticket is good; 65 a ticket is missing or not acceptable; 66 a path cannot\n"
         "be read, is nothing that carries a ticket, or has no valid signature; 64 wrong usage. Of several\n"
         "paths the highest counts.");
-    try {
-        app.parse(argc, argv);
-    } catch (const CLI::Success& request) {
-        return app.exit(request);  // help, version
-    } catch (const CLI::ParseError& error) {
-        complain(companion::describe(app, error));
-        return EX_USAGE;
-    }
+    if (const auto status = companion::parseLine(app, argc, argv)) return *status;
     arguments.color = companion::colorWhenNamed(color);
     return inspectAll(arguments);
 }

@@ -383,15 +383,8 @@ int run(int argc, char** argv) {
                  "lumora-local");
     app.set_version_flag("--version", companion::versionText("lumora-local"));
     declareCommands(app, arguments);
-    try {
-        app.parse(argc, argv);
-        return arguments.upkeep.exitStatus;
-    } catch (const CLI::Success& request) {
-        return app.exit(request);  // help, version
-    } catch (const CLI::ParseError& error) {
-        complain(companion::describe(app, error));
-        return EX_USAGE;
-    }
+    const std::optional<int> status = companion::parseLine(app, argc, argv);
+    return status.value_or(arguments.upkeep.exitStatus);
 }
 
 }  // namespace

@@ -1,11 +1,11 @@
-// The errors of command lines that CLI11 reads.
+// Command lines that CLI11 reads.
+#include <sysexits.h>
+
 #include <CLI/CLI.hpp>
 #include <string_view>
 #include <vector>
 
-#include "base/text.h"
 #include "companion/command_line.h"
-#include "values/format.h"
 
 namespace pinwell::companion {
 namespace {
@@ -60,15 +60,27 @@ std::string describeRest(const CLI::App& app) {
     return rest.empty() ? std::string() : "unexpected argument " + rest.front();
 }
 
-}  // namespace
-
 std::string describe(const CLI::App& app, const CLI::ParseError& error) {
     const auto kind = static_cast<CLI::ExitCodes>(error.get_exit_code());
     if (kind == CLI::ExitCodes::ExtrasError || kind == CLI::ExitCodes::RequiredError) {
         const std::string rest = describeRest(app);
-        if (!rest.empty()) return base::escapeForTerminal(rest);
+        if (!rest.empty()) return rest;
     }
-    return base::escapeForTerminal(error.what());
+    return error.what();
+}
+
+}  // namespace
+
+std::optional<int> parseLine(CLI::App& app, int argc, char** argv) {
+    try {
+        app.parse(argc, argv);
+        return std::nullopt;
+    } catch (const CLI::Success& request) {
+        return app.exit(request);  // help, version
+    } catch (const CLI::ParseError& error) {
+        complain(app.get_name(), describe(app, error));
+        return EX_USAGE;
+    }
 }
 
 }  // namespace pinwell::companion
