@@ -10,6 +10,7 @@
 
 #include "base/file_io.h"
 #include "batch/report.h"
+#include "companion/streams.h"
 #include "src/DownloadDelegate.h"
 #include "values/format.h"
 
@@ -65,8 +66,7 @@ std::optional<std::array<std::string_view, kFields>> fieldsOf(std::string_view l
 }  // namespace
 
 Result<Journal> Journal::open(const std::string& path) {
-    constexpr mode_t kMode = 0666;  // without the bits of the user's mask
-    auto file = base::openRegularFile(path, O_RDWR | O_APPEND | O_CREAT, kMode);
+    auto file = base::openRegularFile(path, O_RDWR | O_APPEND | O_CREAT, companion::kNewFileMode);
     if (!file && file.error().code() == EINVAL)
         return Error(base::kDataErrorDomain, base::kMalformedDocument, path + " is not a regular file.");
     if (!file) return file.error();

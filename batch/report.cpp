@@ -17,6 +17,7 @@
 #include "base/file_io.h"
 #include "base/handle.h"
 #include "base/text.h"
+#include "companion/streams.h"
 #include "src/DownloadDelegate.h"
 #include "values/format.h"
 
@@ -132,14 +133,9 @@ Result<std::string> placeOfReport(const std::string& path) {
 Result<JUnitReport> JUnitReport::begin(const std::string& name) {
     const auto place = placeOfReport(name);
     if (!place) return place.error();
-    const std::string& path = *place;
-    std::string temporary = path + ".XXXXXX";
-    base::FileDescriptor file(::mkostemp(temporary.data(), O_CLOEXEC));
-    if (!file) return Error::posix(errno, path);
-    const mode_t mask = ::umask(0);
-    ::umask(mask);
-    static_cast<void>(::fchmod(file.get(), 0666 & ~mask));
-    JUnitReport report(path, std::move(temporary), std::move(file));
+    auto made = companion::makeFileBeside(*place);
+    if (!made) return made.error();
+    JUnitReport report(*place, std::move(made->path), std::move(made->file));
     report.write(prologue(""));
     return report;
 }

@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <poll.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -132,6 +133,17 @@ void Output::write(std::string_view text) {
         else
             failed_ = true;
     }
+}
+
+base::Result<FileBeside> makeFileBeside(const std::string& path) {
+    std::string name = path + ".XXXXXX";
+    base::FileDescriptor file(::mkostemp(name.data(), O_CLOEXEC));
+    if (!file) return base::Error::posix(errno, path);
+    const mode_t mask = ::umask(0);
+    ::umask(mask);
+    // A file system without modes refuses this.
+    static_cast<void>(::fchmod(file.get(), kNewFileMode & ~mask));
+    return FileBeside{std::move(name), std::move(file)};
 }
 
 }  // namespace pinwell::companion

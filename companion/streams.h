@@ -4,6 +4,8 @@
 // Output is whole lines, in colour only on a terminal.
 #pragma once
 
+#include <sys/types.h>
+
 #include <cstdint>
 #include <optional>
 #include <string>
@@ -96,5 +98,18 @@ class Output {
     bool closed_ = false;
     bool failed_ = false;
 };
+
+/// The mode of new files, without the bits of the user's mask.
+inline constexpr mode_t kNewFileMode = 0666;
+
+/// A new file that is to replace another.
+struct FileBeside {
+    std::string path;
+    base::FileDescriptor file;
+};
+
+/// Makes a file beside `path`, with `path` and a random ending as its name, and with the mode that a new file
+/// gets. Reads the user's mask by setting it, so no other thread may create files meanwhile.
+base::Result<FileBeside> makeFileBeside(const std::string& path);
 
 }  // namespace pinwell::companion

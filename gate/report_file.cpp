@@ -38,8 +38,8 @@ bool isSame(const struct stat& a, const struct stat& b) {
 
 base::Result<void> ReportFile::open() {
     if (path_.empty()) return {};
-    constexpr mode_t kMode = 0666;
-    file_ = base::FileDescriptor(::open(path_.c_str(), O_WRONLY | O_CREAT | O_CLOEXEC | O_NOCTTY, kMode));
+    constexpr int kFlags = O_WRONLY | O_CREAT | O_CLOEXEC | O_NOCTTY;
+    file_ = base::FileDescriptor(::open(path_.c_str(), kFlags, companion::kNewFileMode));
     if (!file_) return cannotWrite(path_, errno);
     return {};
 }

@@ -14,6 +14,7 @@
 #include "base/file_io.h"
 #include "base/text.h"
 #include "codesign/code_directory.h"
+#include "companion/streams.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "values/format.h"
 #include "values/json.h"
@@ -28,8 +29,6 @@ using retrieval::Cause;
 using values::Value;
 
 namespace {
-
-constexpr mode_t kFileMode = 0666;  // without the bits of the user's mask
 
 bool writeAll(const FileDescriptor& file, base::ByteView bytes) {
     while (!bytes.empty()) {
@@ -53,7 +52,7 @@ bool flushFolderOf(const std::string& path) {
 
 Result<void> writeNewFile(base::ByteView contents, const std::string& path) {
     const FileDescriptor file(
-        ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kFileMode));
+        ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, companion::kNewFileMode));
     if (!file) return Error::posix(errno, path);
     if (writeAll(file, contents) && flushFolderOf(path)) return {};
     const Error error = Error::posix(errno, path);
@@ -62,18 +61,14 @@ Result<void> writeNewFile(base::ByteView contents, const std::string& path) {
 }
 
 Result<void> replaceFile(base::ByteView contents, const std::string& path) {
-    std::string temporary = path + ".XXXXXX";
-    const FileDescriptor file(::mkostemp(temporary.data(), O_CLOEXEC));
-    if (!file) return Error::posix(errno, path);
-    const mode_t mask = ::umask(0);
-    ::umask(mask);
-    if (::fchmod(file.get(), kFileMode & ~mask) == 0 && writeAll(file, contents) &&
-        std::rename(temporary.c_str(), path.c_str()) == 0) {
+    const auto made = companion::makeFileBeside(path);
+    if (!made) return made.error();
+    if (writeAll(made->file, contents) && std::rename(made->path.c_str(), path.c_str()) == 0) {
         if (flushFolderOf(path)) return {};
         return Error::posix(errno, path);
     }
     const Error error = Error::posix(errno, path);
-    ::unlink(temporary.c_str());
+    ::unlink(made->path.c_str());
     return error;
 }
 

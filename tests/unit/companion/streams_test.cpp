@@ -100,5 +100,24 @@ TEST_F(PathLists, DoNotWaitForAPipe) {
     EXPECT_EQ(list->next().state, State::end);
 }
 
+TEST(FileBeside, HasTheModeThatTheUsersMaskGives) {
+    const TemporaryDirectory directory;
+    const mode_t before = ::umask(027);
+    const auto made = companion::makeFileBeside(directory / "report");
+    EXPECT_EQ(::umask(before), 027U);
+    ASSERT_TRUE(made);
+    EXPECT_TRUE(made->path.starts_with((directory / "report") + ".")) << made->path;
+    struct stat status {};
+    ASSERT_EQ(::stat(made->path.c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 07777U, 0640U);
+}
+
+TEST(FileBeside, NamesTheFileThatItCouldNotReplace) {
+    const TemporaryDirectory directory;
+    const auto made = companion::makeFileBeside(directory / "missing/report");
+    ASSERT_FALSE(made);
+    EXPECT_EQ(made.error(), base::Error::posix(ENOENT, directory / "missing/report"));
+}
+
 }  // namespace
 }  // namespace pinwell::test
