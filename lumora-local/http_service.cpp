@@ -43,24 +43,6 @@ std::optional<Query> parseQuery(std::string_view target) {
     return query;
 }
 
-std::string percentEncoded(std::string_view text) {
-    constexpr std::string_view kDigits = "0123456789ABCDEF";
-    std::string encoded;
-    for (const char c : text) {
-        const bool plain = (c >= '0' && c <= '9') || (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') ||
-                           c == '-' || c == '.' || c == '_' || c == '~';
-        if (plain) {
-            encoded += c;
-            continue;
-        }
-        const auto byte = static_cast<unsigned char>(c);
-        encoded += '%';
-        encoded += kDigits[byte >> 4U];
-        encoded += kDigits[byte & 0xFU];
-    }
-    return encoded;
-}
-
 std::optional<std::string> percentDecoded(std::string_view text) {
     std::string decoded;
     for (std::size_t i = 0; i < text.size(); ++i) {

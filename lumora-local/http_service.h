@@ -76,10 +76,6 @@ using Query = std::map<std::string, std::string, std::less<>>;
 /// empty or occurs twice, a "%" without its digits, a byte 0, text that is not UTF-8.
 std::optional<Query> parseQuery(std::string_view target);
 
-/// Text in the form of a value, or of a segment of a path: every byte except letters, digits and "-._~" is
-/// encoded.
-std::string percentEncoded(std::string_view text);
-
 /// `nullopt` for a "%" without its digits.
 std::optional<std::string> percentDecoded(std::string_view text);
 

@@ -8,6 +8,7 @@
 #include "lumora-local/http_service.h"
 #include "lumora-local/rfc3339.h"
 #include "values/format.h"
+#include "values/url.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -142,7 +143,7 @@ std::string recordTarget(const std::string& name, Environment environment) {
     std::string target = "/records/";
     for (std::size_t begin = 0; begin <= name.size();) {
         const std::size_t end = std::min(name.find('/', begin), name.size());
-        target += percentEncoded(std::string_view(name).substr(begin, end - begin));
+        target += values::percentEncoded(std::string_view(name).substr(begin, end - begin));
         if (end < name.size()) target += '/';
         begin = end + 1;
     }

@@ -5,6 +5,7 @@
 #include "lumora-local/page.h"
 #include "lumora-local/record_name.h"
 #include "values/format.h"
+#include "values/url.h"
 
 namespace pinwell::lumora {
 namespace {
@@ -64,7 +65,7 @@ Query parametersOf(const SearchForm& form, const Query& query) {
 }
 
 std::string targetOf(const SearchForm& form) {
-    return "/records?by=" + form.by + "&text=" + percentEncoded(form.text) +
+    return "/records?by=" + form.by + "&text=" + values::percentEncoded(form.text) +
            "&environment=" + std::string(toString(form.environment));
 }
 
@@ -72,7 +73,7 @@ Paging pagingOf(const std::string& first, const Query& query, const std::optiona
     Paging paging;
     if (query.contains("after")) paging.first = first;
     const char separator = first.find('?') == std::string::npos ? '?' : '&';
-    if (next) paging.next = first + separator + "after=" + percentEncoded(*next);
+    if (next) paging.next = first + separator + "after=" + values::percentEncoded(*next);
     return paging;
 }
 

@@ -6,8 +6,6 @@
 namespace pinwell::values {
 namespace {
 
-constexpr std::string_view kHexDigits = "0123456789ABCDEF";
-
 bool isAlpha(char c) {
     return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
 }
@@ -26,20 +24,8 @@ bool isReserved(char c) {
     return std::string_view(":/?#[]@!$&'()*+,;=").find(c) != std::string_view::npos;
 }
 
-std::string percentEncodePath(std::string_view path) {
-    std::string text;
-    text.reserve(path.size());
-    for (const char c : path) {
-        if (isUnreserved(c) || std::string_view("/!$&'()*+,;=:@").find(c) != std::string_view::npos) {
-            text += c;
-        } else {
-            const auto byte = static_cast<unsigned char>(c);
-            text += '%';
-            text += kHexDigits[byte >> 4U];
-            text += kHexDigits[byte & 0xFU];
-        }
-    }
-    return text;
+std::string percentEncodedPath(std::string_view path) {
+    return percentEncoded(path, "/!$&'()*+,;=:@");
 }
 
 std::string lowerCase(std::string_view text) {
@@ -130,7 +116,7 @@ std::optional<URL> URL::fromString(std::string_view text) {
 }
 
 std::string URL::absoluteString() const {
-    return isFile_ ? "file://" + percentEncodePath(path_) : text_;
+    return isFile_ ? "file://" + percentEncodedPath(path_) : text_;
 }
 
 std::string URL::lastPathComponent() const {
@@ -159,7 +145,7 @@ URL URL::appendingPathComponent(std::string_view component) const {
     const std::size_t pathEnd = std::min(text_.find_first_of("?#"), text_.size());
     std::string added;
     if (!path_.ends_with('/')) added += '/';
-    added += percentEncodePath(component);
+    added += percentEncodedPath(component);
     url.text_.insert(pathEnd, added);
     url.path_ += added;
     return url;
@@ -171,6 +157,23 @@ URL URL::deletingLastPathComponent() const {
     if (!isFile_ || slash == std::string::npos) return url;
     url.path_ = slash == 0 ? "/" : path_.substr(0, slash);
     return url;
+}
+
+std::string percentEncoded(std::string_view bytes, std::string_view plain) {
+    constexpr std::string_view kDigits = "0123456789ABCDEF";
+    std::string text;
+    text.reserve(bytes.size());
+    for (const char c : bytes) {
+        if (isUnreserved(c) || plain.find(c) != std::string_view::npos) {
+            text += c;
+            continue;
+        }
+        const auto byte = static_cast<unsigned char>(c);
+        text += '%';
+        text += kDigits[byte >> 4U];
+        text += kDigits[byte & 0xFU];
+    }
+    return text;
 }
 
 }  // namespace pinwell::values

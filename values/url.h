@@ -62,4 +62,7 @@ class URL {
 /// begins or ends the name.
 std::string_view pathExtensionOfName(std::string_view name) noexcept;
 
+/// Percent encoding (RFC 3986, section 2.1) of all bytes except letters, digits, "-._~" and those in `plain`.
+std::string percentEncoded(std::string_view bytes, std::string_view plain = {});
+
 }  // namespace pinwell::values

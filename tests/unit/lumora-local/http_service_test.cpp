@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include "values/url.h"
+
 namespace pinwell::lumora {
 namespace {
 
@@ -28,10 +30,10 @@ TEST(Query, IsRefusedIfItIsMalformed) {
 TEST(Query, RoundTripsThroughEncoding) {
     std::string all;
     for (int c = 0; c < 256; ++c) all += static_cast<char>(c);
-    const std::string encoded = percentEncoded(all);
+    const std::string encoded = values::percentEncoded(all);
     EXPECT_EQ(percentDecoded(encoded), all);
     EXPECT_EQ(encoded.find_first_of("\"<>&'/?#+ "), std::string::npos);
-    EXPECT_EQ(percentEncoded("2/2/a-z_.~"), "2%2F2%2Fa-z_.~");
+    EXPECT_EQ(values::percentEncoded("2/2/a-z_.~"), "2%2F2%2Fa-z_.~");
 }
 
 }  // namespace

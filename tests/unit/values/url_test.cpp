@@ -141,5 +141,11 @@ TEST(WebURL, AppendsAnEncodedComponentBeforeTheQuery) {
     EXPECT_EQ(URL::fromString("https://h")->appendingPathComponent("x").absoluteString(), "https://h/x");
 }
 
+TEST(PercentEncoding, KeepsUnreservedCharactersAndThoseThatTheCallerNames) {
+    EXPECT_EQ(percentEncoded("aZ09-._~"), "aZ09-._~");
+    EXPECT_EQ(percentEncoded("a/b:c%\xFF\n"), "a%2Fb%3Ac%25%FF%0A");
+    EXPECT_EQ(percentEncoded("a/b:c", "/"), "a/b%3Ac");
+}
+
 }  // namespace
 }  // namespace pinwell::values
