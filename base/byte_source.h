@@ -1,7 +1,7 @@
 // Positional reading of an artefact's bytes, without loading all of them: from an open file or from memory.
 //
-// read() is for lengths that the caller has compared with a named maximum. Lengths that only a file claims are
-// for readShared(): a range above kReadAtOnce takes memory only for non-zero bytes.
+// read() is for lengths that the caller has compared with a named maximum. Lengths that only a file claims
+// are for readShared(): a range above kReadAtOnce takes memory only for non-zero bytes.
 #pragma once
 
 #include <array>
