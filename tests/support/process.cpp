@@ -127,6 +127,10 @@ FileDescriptor connectOutput(FileActions& actions, Output output, int descriptor
 
 }  // namespace
 
+std::string emulator() {
+    return EMULATOR;
+}
+
 std::vector<std::string> linesOf(std::string_view text) {
     std::vector<std::string> lines;
     while (!text.empty()) {

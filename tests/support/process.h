@@ -26,6 +26,9 @@ inline constexpr int kSanitizerStatus = 99;
 
 using Environment = std::map<std::string, std::string>;
 
+/// The emulator that runs the programs, for tests that are compiled for another processor; otherwise empty.
+std::string emulator();
+
 /// The target of an output of the child.
 enum class Output {
     captured,

@@ -123,6 +123,7 @@ std::string probedByAnotherUser(const std::string& probe) {
 TEST(PlatformDirectory, IsTheInstalledOneForARunWithMoreRightsThanItsCaller) {
     if (!test::isSuperuser())
         GTEST_SKIP() << "only a superuser can make a program that runs with other rights";
+    if (!test::emulator().empty()) GTEST_SKIP() << "an emulated program has the rights of its emulator";
     const TemporaryDirectory directory;
     test::setMode(directory.path(), 0755);
     const std::string probe = directory / "probe";

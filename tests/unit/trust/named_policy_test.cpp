@@ -7,6 +7,7 @@
 #include <optional>
 
 #include "scene.h"
+#include "support/process.h"
 #include "trust/include/pinwell/ostrel_security.h"
 
 namespace pinwell::trust {
@@ -27,10 +28,9 @@ PolicyRef found(const std::string& sort) {
 const std::optional<PolicyRef> kUnavailablePolicy = std::nullopt;
 const std::optional<PolicyRef> kRefusedPolicy = PolicyRef();
 
-/// The emulator is empty unless the tests are compiled for another processor.
 std::string probe(const std::string& directory) {
     const std::string command =
-        "LD_LIBRARY_PATH='" + directory + "' " + EMULATOR + " '" + NAMED_POLICY_PROBE + "'";
+        "LD_LIBRARY_PATH='" + directory + "' " + test::emulator() + " '" + NAMED_POLICY_PROBE + "'";
     FILE* const pipe = popen(command.c_str(), "r");
     std::array<char, 256> line{};
     const std::size_t size = fread(line.data(), 1, line.size(), pipe);
