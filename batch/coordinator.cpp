@@ -1,4 +1,4 @@
-#include "batch/coordinator.h"
+#include "coordinator.h"
 
 #include <poll.h>
 

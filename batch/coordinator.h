@@ -17,12 +17,12 @@
 #include <variant>
 #include <vector>
 
-#include "batch/report.h"
-#include "batch/settings.h"
-#include "batch/workers.h"
 #include "companion/streams.h"
+#include "report.h"
 #include "retrieval/artefact_run.h"
 #include "retrieval/record_service.h"
+#include "settings.h"
+#include "workers.h"
 
 namespace pinwell::batch {
 

@@ -1,4 +1,4 @@
-#include "batch/journal.h"
+#include "journal.h"
 
 #include <fcntl.h>
 #include <unistd.h>
@@ -9,8 +9,8 @@
 #include <utility>
 
 #include "base/file_io.h"
-#include "batch/report.h"
 #include "companion/streams.h"
+#include "report.h"
 #include "src/DownloadDelegate.h"
 #include "values/format.h"
 

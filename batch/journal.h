@@ -24,8 +24,8 @@
 
 #include "base/error.h"
 #include "base/handle.h"
-#include "batch/selection.h"
 #include "retrieval/report.h"
+#include "selection.h"
 
 namespace pinwell::batch {
 

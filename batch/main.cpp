@@ -10,18 +10,18 @@
 #include <string>
 #include <utility>
 
-#include "batch/coordinator.h"
-#include "batch/journal.h"
-#include "batch/report.h"
-#include "batch/selection.h"
-#include "batch/settings.h"
 #include "companion/process.h"
 #include "companion/streams.h"
+#include "coordinator.h"
+#include "journal.h"
+#include "report.h"
 #include "sandbox/sandbox.h"
+#include "selection.h"
+#include "settings.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"
+#include "src/host_platform.h"
 #include "src/messages.h"
-#include "src/platform.h"
 #include "values/format.h"
 
 namespace {

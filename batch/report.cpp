@@ -1,4 +1,4 @@
-#include "batch/report.h"
+#include "report.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>

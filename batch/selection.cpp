@@ -1,4 +1,4 @@
-#include "batch/selection.h"
+#include "selection.h"
 
 #include <sys/stat.h>
 

@@ -1,4 +1,4 @@
-#include "batch/settings.h"
+#include "settings.h"
 
 #include <sysexits.h>
 

@@ -1,4 +1,4 @@
-#include "batch/workers.h"
+#include "workers.h"
 
 #include <sys/eventfd.h>
 #include <unistd.h>

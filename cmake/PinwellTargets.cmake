@@ -1,12 +1,25 @@
 # The three kinds of target in this tree. All targets of a kind are built in the same way.
 
-# pinwell_library(NAME SOURCES...): the static library of one folder. Its headers are included as
-# "folder/header.h" from the folder above, which keeps every dependency visible in the source.
+# pinwell_library(NAME SOURCES...): the static library of one folder. It finds the public headers of the libraries that
+# it links, as "library/header.h", and its own private headers, which are beside their sources, as "header.h". An include
+# of anything else of ours does not compile.
 function(pinwell_library name)
   add_library(${name} STATIC ${ARGN})
-  target_include_directories(${name} PUBLIC ${CMAKE_CURRENT_SOURCE_DIR}/..)
   target_link_libraries(${name} PRIVATE pinwell_warnings pinwell_hardening PUBLIC pinwell_sanitizers)
 endfunction()
+
+# pinwell_headers(LIBRARY HEADERS...): the public headers of a library, by the names in the includes of others. The files
+# are in the folder include/ beside its sources.
+function(pinwell_headers library)
+  list(TRANSFORM ARGN PREPEND include/)
+  target_sources(${library} PUBLIC FILE_SET HEADERS BASE_DIRS include FILES ${ARGN})
+  target_include_directories(pinwell_insides INTERFACE ${CMAKE_CURRENT_SOURCE_DIR}/include)
+endfunction()
+
+# For tests, fuzz targets and benchmarks: all headers of ours, the private ones too. These have the names of their folders
+# ("trust/chain_builder.h").
+add_library(pinwell_insides INTERFACE)
+target_include_directories(pinwell_insides INTERFACE ${PROJECT_SOURCE_DIR} ${PROJECT_SOURCE_DIR}/platform)
 
 # pinwell_executable(NAME SOURCES...): a program, in <build>/bin.
 function(pinwell_executable name)

@@ -1,4 +1,4 @@
-#include "gate/case.h"
+#include "case.h"
 
 #include <utility>
 
@@ -6,7 +6,7 @@
 #include "base/bytes.h"
 #include "base/places.h"
 #include "codesign/code_error.h"
-#include "gate/policy.h"
+#include "policy.h"
 #include "src/ticket_record.h"
 #include "values/format.h"
 #include "values/url.h"

@@ -12,8 +12,8 @@
 
 #include "base/bytes.h"
 #include "formats/explain_ticket.h"
-#include "gate/run.h"
 #include "retrieval/ticket_fetch.h"
+#include "run.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/platform.h"
 #include "verify/judged_ticket.h"

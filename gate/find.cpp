@@ -1,4 +1,4 @@
-#include "gate/find.h"
+#include "find.h"
 
 #include <algorithm>
 #include <filesystem>

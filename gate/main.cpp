@@ -12,16 +12,16 @@
 #include "base/error.h"
 #include "companion/command_line.h"
 #include "companion/process.h"
-#include "gate/find.h"
-#include "gate/policy.h"
-#include "gate/render.h"
-#include "gate/report_file.h"
-#include "gate/run.h"
+#include "find.h"
+#include "policy.h"
+#include "render.h"
+#include "report_file.h"
+#include "run.h"
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"
+#include "src/host_platform.h"
 #include "src/messages.h"
-#include "src/platform.h"
 
 namespace {
 

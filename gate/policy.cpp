@@ -1,7 +1,7 @@
 // The parser of the policy file is compiled in: Debian's shared library reports errors only by exceptions.
 #define TOML_HEADER_ONLY 1
 #define TOML_EXCEPTIONS 0
-#include "gate/policy.h"
+#include "policy.h"
 
 #include <toml++/toml.h>
 

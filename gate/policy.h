@@ -16,7 +16,7 @@
 #include <string_view>
 
 #include "base/error.h"
-#include "gate/run.h"
+#include "run.h"
 #include "verify/code.h"
 #include "verify/judged_ticket.h"
 

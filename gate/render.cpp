@@ -1,5 +1,5 @@
 // Chooses the format of a report, and writes it as text.
-#include "gate/render.h"
+#include "render.h"
 
 #include "base/text.h"
 #include "values/format.h"

@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "gate/run.h"
+#include "run.h"
 
 namespace pinwell::gate {
 

@@ -4,7 +4,7 @@
 #include <set>
 
 #include "base/text.h"
-#include "gate/render.h"
+#include "render.h"
 #include "values/date.h"
 #include "values/format.h"
 #include "values/url.h"

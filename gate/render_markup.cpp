@@ -1,6 +1,6 @@
 // The reports in markup: JUnit XML and HTML.
 #include "base/text.h"
-#include "gate/render.h"
+#include "render.h"
 #include "values/format.h"
 
 namespace pinwell::gate {

@@ -1,4 +1,4 @@
-#include "gate/report_file.h"
+#include "report_file.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>

@@ -1,4 +1,4 @@
-#include "gate/run.h"
+#include "run.h"
 
 #include <sysexits.h>
 
@@ -7,8 +7,8 @@
 #include <memory>
 #include <utility>
 
+#include "case.h"
 #include "codesign/code_error.h"
-#include "gate/case.h"
 
 namespace pinwell::gate {
 

@@ -1,4 +1,4 @@
-#include "inspect/gather.h"
+#include "gather.h"
 
 #include <algorithm>
 #include <filesystem>
@@ -8,7 +8,7 @@
 #include "base/bytes.h"
 #include "formats/package_trailers.h"
 #include "formats/tm_ticket.h"
-#include "inspect/gather_ticket.h"
+#include "gather_ticket.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedDiskImage.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"

@@ -5,7 +5,7 @@
 #include <string>
 
 #include "formats/explain_ticket.h"
-#include "inspect/report.h"
+#include "report.h"
 #include "src/platform.h"
 #include "values/url.h"
 

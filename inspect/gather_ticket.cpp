@@ -1,4 +1,4 @@
-#include "inspect/gather_ticket.h"
+#include "gather_ticket.h"
 
 #include <algorithm>
 #include <utility>

@@ -2,7 +2,7 @@
 #pragma once
 
 #include "base/bytes.h"
-#include "inspect/report.h"
+#include "report.h"
 #include "trust/trust.h"
 
 namespace pinwell::inspect {

@@ -12,14 +12,14 @@
 #include "companion/command_line.h"
 #include "companion/process.h"
 #include "companion/streams.h"
-#include "inspect/gather.h"
-#include "inspect/render_json.h"
-#include "inspect/render_text.h"
+#include "gather.h"
+#include "render_json.h"
+#include "render_text.h"
 #include "runtime/signals.h"
 #include "sandbox/sandbox.h"
 #include "src/confinement.h"
+#include "src/host_platform.h"
 #include "src/messages.h"
-#include "src/platform.h"
 
 namespace {
 

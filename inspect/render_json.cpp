@@ -1,4 +1,4 @@
-#include "inspect/render_json.h"
+#include "render_json.h"
 
 #include <nlohmann/json.hpp>
 #include <utility>

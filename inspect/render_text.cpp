@@ -1,4 +1,4 @@
-#include "inspect/render_text.h"
+#include "render_text.h"
 
 #include <algorithm>
 #include <utility>

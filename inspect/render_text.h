@@ -3,7 +3,7 @@
 
 #include <string>
 
-#include "inspect/report.h"
+#include "report.h"
 
 namespace pinwell::inspect {
 

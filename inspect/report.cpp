@@ -1,4 +1,4 @@
-#include "inspect/report.h"
+#include "report.h"
 
 #include <sysexits.h>
 

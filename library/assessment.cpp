@@ -1,4 +1,4 @@
-#include "library/assessment.h"
+#include "assessment.h"
 
 #include <pthread.h>
 
@@ -6,10 +6,10 @@
 #include <memory>
 #include <utility>
 
+#include "c_calls.h"
 #include "formats/code_hashes.h"
 #include "formats/explain_ticket.h"
-#include "library/c_calls.h"
-#include "library/local_platform.h"
+#include "local_platform.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "verify/check.h"
 #include "verify/judged_ticket.h"

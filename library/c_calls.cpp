@@ -1,4 +1,4 @@
-#include "library/c_calls.h"
+#include "c_calls.h"
 
 #include <pthread.h>
 
@@ -7,7 +7,7 @@
 #include <string_view>
 
 #include "base/text.h"
-#include "library/handles.h"
+#include "handles.h"
 #include "src/messages.h"
 
 namespace pinwell::library {

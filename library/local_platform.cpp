@@ -1,9 +1,11 @@
-#include "library/local_platform.h"
+#include "local_platform.h"
 
 #include <stdexcept>
 #include <utility>
 
-#include "library/roots.h"
+#include "defaults/user_defaults.h"
+#include "https/session.h"
+#include "roots.h"
 #include "src/PWHashedFile/file_kind.h"
 #include "trust/trust_service.h"
 

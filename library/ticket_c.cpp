@@ -7,10 +7,10 @@
 #include <memory>
 #include <utility>
 
+#include "assessment.h"
+#include "c_calls.h"
 #include "formats/code_hashes.h"
-#include "library/assessment.h"
-#include "library/c_calls.h"
-#include "library/handles.h"
+#include "handles.h"
 
 namespace pinwell::library {
 namespace {

@@ -6,7 +6,7 @@
 #include "config/platform_directory.h"
 #include "formats/explain_ticket.h"
 #include "formats/tm_ticket.h"
-#include "library/roots.h"
+#include "roots.h"
 #include "trust/certificate.h"
 #include "trust/trust_service.h"
 #include "values/date.h"

@@ -1,8 +1,8 @@
 // The parts that this build leaves out. Their commands and options exist, and fail with a message that names
 // the missing part.
-#include "lumora-local/failure.h"
-#include "lumora-local/metrics.h"
-#include "lumora-local/signing_key.h"
+#include "failure.h"
+#include "metrics.h"
+#include "signing_key.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

@@ -1,4 +1,4 @@
-#include "lumora-local/access_list.h"
+#include "access_list.h"
 
 // The parser is compiled in: Debian's shared library reports errors only by exceptions.
 #define TOML_HEADER_ONLY 1
@@ -7,7 +7,7 @@
 
 #include "base/bytes.h"
 #include "base/file_io.h"
-#include "lumora-local/failure.h"
+#include "failure.h"
 #include "values/format.h"
 #include "values/toml_keys.h"
 

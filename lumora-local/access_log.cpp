@@ -1,7 +1,7 @@
-#include "lumora-local/access_log.h"
+#include "access_log.h"
 
 #include "base/text.h"
-#include "lumora-local/rfc3339.h"
+#include "rfc3339.h"
 #include "values/format.h"
 #include "values/json.h"
 #include "values/value.h"

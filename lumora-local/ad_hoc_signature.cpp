@@ -1,4 +1,4 @@
-#include "lumora-local/ad_hoc_signature.h"
+#include "ad_hoc_signature.h"
 
 #include <algorithm>
 #include <array>
@@ -7,8 +7,8 @@
 #include "base/byte_io.h"
 #include "base/text.h"
 #include "crypto/crypto.h"
+#include "failure.h"
 #include "formats/superblob.h"
-#include "lumora-local/failure.h"
 #include "values/format.h"
 #include "values/property_list.h"
 

@@ -1,9 +1,9 @@
 #include <algorithm>
 #include <initializer_list>
 
+#include "admin_routes.h"
 #include "base/text.h"
 #include "crypto/crypto.h"
-#include "lumora-local/admin_routes.h"
 #include "values/format.h"
 #include "values/json.h"
 #include "values/value.h"

@@ -1,4 +1,4 @@
-#include "lumora-local/admin_listener.h"
+#include "admin_listener.h"
 
 #include <signal.h>
 #include <unistd.h>
@@ -6,9 +6,9 @@
 #include <exception>
 #include <utility>
 
-#include "lumora-local/admin_routes.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/service_store.h"
+#include "admin_routes.h"
+#include "failure.h"
+#include "service_store.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

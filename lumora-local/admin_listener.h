@@ -9,11 +9,11 @@
 #include <string>
 #include <thread>
 
-#include "lumora-local/admin_routes.h"
-#include "lumora-local/endpoint.h"
-#include "lumora-local/serve_command.h"
-#include "lumora-local/server.h"
+#include "admin_routes.h"
+#include "endpoint.h"
 #include "sandbox/sandbox.h"
+#include "serve_command.h"
+#include "server.h"
 
 namespace pinwell::lumora {
 

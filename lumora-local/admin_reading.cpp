@@ -1,11 +1,11 @@
 #include <algorithm>
 #include <charconv>
 
+#include "admin_routes.h"
+#include "admin_service.h"
 #include "base/text.h"
-#include "lumora-local/admin_routes.h"
-#include "lumora-local/admin_service.h"
-#include "lumora-local/record_name.h"
-#include "lumora-local/rfc3339.h"
+#include "record_name.h"
+#include "rfc3339.h"
 #include "values/format.h"
 #include "values/json.h"
 #include "values/value.h"

@@ -14,10 +14,10 @@
 #include <string>
 #include <string_view>
 
-#include "lumora-local/admin_service.h"
-#include "lumora-local/commands.h"
-#include "lumora-local/record_store.h"
-#include "lumora-local/ticket_maker.h"
+#include "admin_service.h"
+#include "commands.h"
+#include "record_store.h"
+#include "ticket_maker.h"
 
 namespace pinwell::lumora {
 

@@ -1,11 +1,11 @@
-#include "lumora-local/admin_service.h"
+#include "admin_service.h"
 
 #include <algorithm>
 #include <exception>
 #include <utility>
 
+#include "admin_routes.h"
 #include "base/text.h"
-#include "lumora-local/admin_routes.h"
 #include "values/format.h"
 #include "values/json.h"
 #include "values/value.h"

@@ -25,9 +25,9 @@
 #include <unordered_map>
 #include <vector>
 
-#include "lumora-local/access_list.h"
-#include "lumora-local/http_service.h"
-#include "lumora-local/record_store.h"
+#include "access_list.h"
+#include "http_service.h"
+#include "record_store.h"
 #include "values/date.h"
 
 namespace pinwell::lumora {

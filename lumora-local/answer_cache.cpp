@@ -1,4 +1,4 @@
-#include "lumora-local/answer_cache.h"
+#include "answer_cache.h"
 
 #include <utility>
 

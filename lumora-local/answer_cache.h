@@ -15,7 +15,7 @@
 #include <unordered_map>
 #include <vector>
 
-#include "lumora-local/record_name.h"
+#include "record_name.h"
 
 namespace pinwell::lumora {
 

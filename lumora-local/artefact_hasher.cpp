@@ -1,12 +1,13 @@
-#include "lumora-local/artefact_hasher.h"
+#include "artefact_hasher.h"
 
 #include <filesystem>
 #include <system_error>
 
 #include "base/bytes.h"
-#include "lumora-local/failure.h"
+#include "failure.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/cdhash_extract.h"
+#include "src/host_platform.h"
 #include "src/messages.h"
 #include "src/platform.h"
 #include "values/format.h"

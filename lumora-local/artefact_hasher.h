@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "lumora-local/record_name.h"
+#include "record_name.h"
 
 namespace pinwell::lumora {
 

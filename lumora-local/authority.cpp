@@ -1,9 +1,9 @@
-#include "lumora-local/authority.h"
+#include "authority.h"
 
-#include "lumora-local/certificates.h"
-#include "lumora-local/endpoint.h"
-#include "lumora-local/key_file.h"
-#include "lumora-local/openssl.h"
+#include "certificates.h"
+#include "endpoint.h"
+#include "key_file.h"
+#include "openssl.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -11,12 +11,12 @@
 #include <vector>
 
 #include "base/file_io.h"
-#include "lumora-local/event.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/file_writing.h"
-#include "lumora-local/sqlite_store.h"
-#include "lumora-local/sqlite_tables.h"
-#include "lumora-local/upkeep.h"
+#include "event.h"
+#include "failure.h"
+#include "file_writing.h"
+#include "sqlite_store.h"
+#include "sqlite_tables.h"
+#include "upkeep.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

@@ -1,8 +1,8 @@
 #include <ctime>
 
+#include "authority.h"
 #include "base/file_io.h"
-#include "lumora-local/authority.h"
-#include "lumora-local/certificates.h"
+#include "certificates.h"
 
 namespace pinwell::lumora {
 namespace {

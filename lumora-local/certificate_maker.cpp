@@ -6,7 +6,7 @@
 #include <ctime>
 
 #include "base/bytes.h"
-#include "lumora-local/certificates.h"
+#include "certificates.h"
 
 namespace pinwell::lumora {
 namespace {

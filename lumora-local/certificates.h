@@ -11,7 +11,7 @@
 #include <string_view>
 #include <vector>
 
-#include "lumora-local/openssl.h"
+#include "openssl.h"
 #include "values/date.h"
 
 namespace pinwell::lumora {

@@ -5,16 +5,16 @@
 #include <memory>
 #include <system_error>
 
+#include "access_list.h"
 #include "base/text.h"
+#include "certificates.h"
 #include "config/platform_directory.h"
-#include "lumora-local/access_list.h"
-#include "lumora-local/certificates.h"
-#include "lumora-local/event.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/key_file.h"
-#include "lumora-local/rfc3339.h"
-#include "lumora-local/service_store.h"
-#include "lumora-local/upkeep.h"
+#include "event.h"
+#include "failure.h"
+#include "key_file.h"
+#include "rfc3339.h"
+#include "service_store.h"
+#include "upkeep.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

@@ -1,4 +1,4 @@
-#include "lumora-local/command_line.h"
+#include "command_line.h"
 
 #include <pwd.h>
 #include <unistd.h>
@@ -8,7 +8,7 @@
 #include <filesystem>
 #include <system_error>
 
-#include "lumora-local/failure.h"
+#include "failure.h"
 
 namespace pinwell::lumora {
 namespace {

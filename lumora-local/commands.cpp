@@ -1,11 +1,11 @@
-#include "lumora-local/commands.h"
+#include "commands.h"
 
 #include <filesystem>
 #include <system_error>
 
 #include "base/bytes.h"
 #include "base/text.h"
-#include "lumora-local/failure.h"
+#include "failure.h"
 #include "values/format.h"
 #include "values/json.h"
 #include "values/value.h"

@@ -5,9 +5,9 @@
 #include <string>
 #include <vector>
 
-#include "lumora-local/artefact_hasher.h"
-#include "lumora-local/record_store.h"
-#include "lumora-local/ticket_maker.h"
+#include "artefact_hasher.h"
+#include "record_store.h"
+#include "ticket_maker.h"
 #include "values/date.h"
 
 namespace pinwell::lumora {

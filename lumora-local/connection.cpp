@@ -1,4 +1,4 @@
-#include "lumora-local/connection.h"
+#include "connection.h"
 
 #include <array>
 #include <boost/asio/buffer.hpp>

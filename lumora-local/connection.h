@@ -19,11 +19,11 @@
 #include <string>
 
 #include "base/bytes.h"
-#include "lumora-local/connection_table.h"
-#include "lumora-local/http_service.h"
-#include "lumora-local/server.h"
-#include "lumora-local/tls_context.h"
-#include "lumora-local/tls_stream.h"
+#include "connection_table.h"
+#include "http_service.h"
+#include "server.h"
+#include "tls_context.h"
+#include "tls_stream.h"
 
 namespace pinwell::lumora {
 

@@ -1,4 +1,4 @@
-#include "lumora-local/connection_table.h"
+#include "connection_table.h"
 
 #include <algorithm>
 #include <utility>

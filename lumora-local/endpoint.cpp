@@ -1,4 +1,4 @@
-#include "lumora-local/endpoint.h"
+#include "endpoint.h"
 
 #include <arpa/inet.h>
 #include <netdb.h>
@@ -14,7 +14,7 @@
 #include <system_error>
 
 #include "base/handle.h"
-#include "lumora-local/failure.h"
+#include "failure.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

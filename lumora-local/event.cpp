@@ -1,4 +1,4 @@
-#include "lumora-local/event.h"
+#include "event.h"
 
 #include <array>
 #include <nlohmann/json.hpp>
@@ -6,9 +6,9 @@
 #include "base/bytes.h"
 #include "base/text.h"
 #include "crypto/crypto.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/record_store.h"
-#include "lumora-local/rfc3339.h"
+#include "failure.h"
+#include "record_store.h"
+#include "rfc3339.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

@@ -23,7 +23,7 @@
 #include <string_view>
 #include <vector>
 
-#include "lumora-local/record_name.h"
+#include "record_name.h"
 #include "values/date.h"
 
 namespace pinwell::lumora {

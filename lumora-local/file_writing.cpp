@@ -1,4 +1,4 @@
-#include "lumora-local/file_writing.h"
+#include "file_writing.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -10,7 +10,7 @@
 #include <system_error>
 
 #include "base/handle.h"
-#include "lumora-local/failure.h"
+#include "failure.h"
 #include "runtime/process.h"
 #include "values/format.h"
 

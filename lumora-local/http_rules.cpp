@@ -1,7 +1,7 @@
 #include <algorithm>
 #include <boost/beast/core/string.hpp>
 
-#include "lumora-local/connection.h"
+#include "connection.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -1,4 +1,4 @@
-#include "lumora-local/http_service.h"
+#include "http_service.h"
 
 #include <algorithm>
 

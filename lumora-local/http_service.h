@@ -10,7 +10,7 @@
 #include <vector>
 
 #include "base/bytes.h"
-#include "lumora-local/service_counts.h"
+#include "service_counts.h"
 
 namespace pinwell::lumora {
 

@@ -2,15 +2,15 @@
 #include <filesystem>
 #include <system_error>
 
+#include "authority.h"
+#include "certificates.h"
 #include "config/platform_directory.h"
-#include "lumora-local/authority.h"
-#include "lumora-local/certificates.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/file_writing.h"
-#include "lumora-local/key_file.h"
-#include "lumora-local/rfc3339.h"
-#include "lumora-local/tls_context.h"
-#include "lumora-local/upkeep.h"
+#include "failure.h"
+#include "file_writing.h"
+#include "key_file.h"
+#include "rfc3339.h"
+#include "tls_context.h"
+#include "upkeep.h"
 #include "values/format.h"
 #include "values/value.h"
 

@@ -1,4 +1,4 @@
-#include "lumora-local/key_file.h"
+#include "key_file.h"
 
 #include <fcntl.h>
 #include <openssl/crypto.h>
@@ -15,7 +15,7 @@
 
 #include "base/error.h"
 #include "base/file_io.h"
-#include "lumora-local/failure.h"
+#include "failure.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

@@ -10,7 +10,7 @@
 #include <string>
 #include <string_view>
 
-#include "lumora-local/openssl.h"
+#include "openssl.h"
 
 namespace pinwell::lumora {
 

@@ -1,4 +1,4 @@
-#include "lumora-local/lookup.h"
+#include "lookup.h"
 
 #include <algorithm>
 #include <span>

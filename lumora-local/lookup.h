@@ -24,12 +24,12 @@
 #include <utility>
 #include <vector>
 
+#include "answer_cache.h"
 #include "base/bytes.h"
-#include "lumora-local/answer_cache.h"
-#include "lumora-local/endpoint.h"
-#include "lumora-local/http_service.h"
-#include "lumora-local/record_store.h"
-#include "lumora-local/service_counts.h"
+#include "endpoint.h"
+#include "http_service.h"
+#include "record_store.h"
+#include "service_counts.h"
 
 namespace pinwell::lumora {
 

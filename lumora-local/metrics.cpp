@@ -1,4 +1,4 @@
-#include "lumora-local/metrics.h"
+#include "metrics.h"
 
 #include <prometheus/metric_family.h>
 #include <prometheus/text_serializer.h>

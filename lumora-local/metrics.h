@@ -14,9 +14,9 @@
 #include <string_view>
 #include <vector>
 
-#include "lumora-local/endpoint.h"
-#include "lumora-local/record_store.h"
-#include "lumora-local/service_counts.h"
+#include "endpoint.h"
+#include "record_store.h"
+#include "service_counts.h"
 #include "values/date.h"
 
 namespace pinwell::lumora {

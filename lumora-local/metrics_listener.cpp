@@ -14,7 +14,7 @@
 #include <thread>
 #include <utility>
 
-#include "lumora-local/metrics.h"
+#include "metrics.h"
 
 namespace pinwell::lumora {
 namespace {

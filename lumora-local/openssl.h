@@ -7,7 +7,7 @@
 #include <string_view>
 
 #include "crypto/openssl.h"
-#include "lumora-local/failure.h"
+#include "failure.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

@@ -1,12 +1,12 @@
-#include "lumora-local/page.h"
+#include "page.h"
 
 #include <algorithm>
 #include <array>
 #include <utility>
 
 #include "base/text.h"
-#include "lumora-local/http_service.h"
-#include "lumora-local/rfc3339.h"
+#include "http_service.h"
+#include "rfc3339.h"
 #include "values/format.h"
 #include "values/url.h"
 

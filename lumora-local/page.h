@@ -9,9 +9,9 @@
 #include <string>
 #include <vector>
 
-#include "lumora-local/event.h"
-#include "lumora-local/record_name.h"
-#include "lumora-local/record_store.h"
+#include "event.h"
+#include "record_name.h"
+#include "record_store.h"
 
 namespace pinwell::lumora {
 

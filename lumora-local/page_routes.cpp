@@ -1,9 +1,9 @@
 #include <utility>
 
-#include "lumora-local/admin_routes.h"
-#include "lumora-local/admin_service.h"
-#include "lumora-local/page.h"
-#include "lumora-local/record_name.h"
+#include "admin_routes.h"
+#include "admin_service.h"
+#include "page.h"
+#include "record_name.h"
 #include "values/format.h"
 #include "values/url.h"
 

@@ -2,10 +2,10 @@
 #include <chrono>
 #include <thread>
 
-#include "lumora-local/failure.h"
-#include "lumora-local/postgres_store.h"
-#include "lumora-local/postgres_tables.h"
-#include "lumora-local/store_rules.h"
+#include "failure.h"
+#include "postgres_store.h"
+#include "postgres_tables.h"
+#include "store_rules.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

@@ -1,4 +1,4 @@
-#include "lumora-local/postgres_connection.h"
+#include "postgres_connection.h"
 
 #include <libpq-fe.h>
 #include <poll.h>

@@ -16,7 +16,7 @@
 #include <vector>
 
 #include "base/bytes.h"
-#include "lumora-local/failure.h"
+#include "failure.h"
 
 struct pg_conn;
 struct pg_result;

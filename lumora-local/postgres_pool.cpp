@@ -1,4 +1,4 @@
-#include "lumora-local/postgres_pool.h"
+#include "postgres_pool.h"
 
 #include <libpq-fe.h>
 #include <algorithm>
@@ -6,7 +6,7 @@
 #include <map>
 #include <memory>
 
-#include "lumora-local/failure.h"
+#include "failure.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "lumora-local/postgres_connection.h"
+#include "postgres_connection.h"
 
 namespace pinwell::lumora {
 

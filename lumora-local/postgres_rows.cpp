@@ -3,9 +3,9 @@
 #include "base/byte_io.h"
 #include "base/text.h"
 #include "crypto/crypto.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/postgres_tables.h"
-#include "lumora-local/store_rules.h"
+#include "failure.h"
+#include "postgres_tables.h"
+#include "store_rules.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

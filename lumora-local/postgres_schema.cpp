@@ -1,8 +1,8 @@
 #include <array>
 #include <string>
 
-#include "lumora-local/failure.h"
-#include "lumora-local/postgres_tables.h"
+#include "failure.h"
+#include "postgres_tables.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

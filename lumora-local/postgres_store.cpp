@@ -1,10 +1,10 @@
-#include "lumora-local/postgres_store.h"
+#include "postgres_store.h"
 
 #include <algorithm>
 #include <chrono>
 
-#include "lumora-local/failure.h"
-#include "lumora-local/postgres_tables.h"
+#include "failure.h"
+#include "postgres_tables.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

@@ -9,8 +9,8 @@
 #include <memory>
 #include <string>
 
-#include "lumora-local/postgres_pool.h"
-#include "lumora-local/record_store.h"
+#include "postgres_pool.h"
+#include "record_store.h"
 
 namespace pinwell::lumora {
 

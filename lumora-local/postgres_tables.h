@@ -12,8 +12,8 @@
 #include <string>
 #include <vector>
 
-#include "lumora-local/postgres_connection.h"
-#include "lumora-local/record_store.h"
+#include "postgres_connection.h"
+#include "record_store.h"
 
 namespace pinwell::lumora {
 

@@ -1,4 +1,4 @@
-#include "lumora-local/record_name.h"
+#include "record_name.h"
 
 #include "base/text.h"
 #include "formats/tm_ticket.h"

@@ -11,9 +11,9 @@
 #include <vector>
 
 #include "base/bytes.h"
-#include "lumora-local/event.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/record_name.h"
+#include "event.h"
+#include "failure.h"
+#include "record_name.h"
 #include "values/date.h"
 
 namespace pinwell::lumora {

@@ -1,4 +1,4 @@
-#include "lumora-local/rfc3339.h"
+#include "rfc3339.h"
 
 #include <chrono>
 #include <cstdint>

@@ -10,11 +10,11 @@
 // The executables are universal images of two slices, each signed ad hoc (ad_hoc_signature.h).
 #include <map>
 
+#include "ad_hoc_signature.h"
 #include "base/byte_io.h"
+#include "file_writing.h"
 #include "formats/executable_image.h"
-#include "lumora-local/ad_hoc_signature.h"
-#include "lumora-local/file_writing.h"
-#include "lumora-local/samples.h"
+#include "samples.h"
 #include "values/format.h"
 #include "values/value.h"
 

@@ -35,11 +35,11 @@
 #include <cstdint>
 #include <utility>
 
+#include "ad_hoc_signature.h"
 #include "base/byte_io.h"
+#include "file_writing.h"
 #include "formats/disk_image.h"
-#include "lumora-local/ad_hoc_signature.h"
-#include "lumora-local/file_writing.h"
-#include "lumora-local/samples.h"
+#include "samples.h"
 
 namespace pinwell::lumora {
 namespace {

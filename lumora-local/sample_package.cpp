@@ -17,10 +17,10 @@
 
 #include "base/byte_io.h"
 #include "base/text.h"
+#include "certificates.h"
 #include "crypto/crypto.h"
-#include "lumora-local/certificates.h"
-#include "lumora-local/file_writing.h"
-#include "lumora-local/samples.h"
+#include "file_writing.h"
+#include "samples.h"
 
 namespace pinwell::lumora {
 namespace {

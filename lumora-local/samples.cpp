@@ -1,4 +1,4 @@
-#include "lumora-local/samples.h"
+#include "samples.h"
 
 #include <zlib.h>
 
@@ -6,8 +6,8 @@
 #include <system_error>
 #include <utility>
 
-#include "lumora-local/failure.h"
-#include "lumora-local/file_writing.h"
+#include "failure.h"
+#include "file_writing.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

@@ -1,4 +1,4 @@
-#include "lumora-local/serve_command.h"
+#include "serve_command.h"
 
 #include <pthread.h>
 #include <signal.h>
@@ -22,16 +22,16 @@
 #include <optional>
 #include <string_view>
 
-#include "lumora-local/admin_listener.h"
-#include "lumora-local/certificates.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/file_writing.h"
-#include "lumora-local/key_file.h"
-#include "lumora-local/lookup.h"
-#include "lumora-local/metrics.h"
-#include "lumora-local/server.h"
-#include "lumora-local/service_store.h"
+#include "admin_listener.h"
+#include "certificates.h"
+#include "failure.h"
+#include "file_writing.h"
+#include "key_file.h"
+#include "lookup.h"
+#include "metrics.h"
 #include "sandbox/sandbox.h"
+#include "server.h"
+#include "service_store.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

@@ -7,8 +7,8 @@
 #include <string_view>
 
 #include "base/handle.h"
-#include "lumora-local/endpoint.h"
-#include "lumora-local/service_directory.h"
+#include "endpoint.h"
+#include "service_directory.h"
 
 namespace pinwell::lumora {
 

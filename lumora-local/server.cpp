@@ -1,4 +1,4 @@
-#include "lumora-local/server.h"
+#include "server.h"
 
 #include <algorithm>
 #include <atomic>
@@ -12,7 +12,7 @@
 #include <memory>
 #include <thread>
 
-#include "lumora-local/connection.h"
+#include "connection.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

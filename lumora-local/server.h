@@ -6,11 +6,11 @@
 #include <string_view>
 #include <vector>
 
-#include "lumora-local/access_log.h"
-#include "lumora-local/endpoint.h"
-#include "lumora-local/http_service.h"
-#include "lumora-local/service_counts.h"
-#include "lumora-local/tls_context.h"
+#include "access_log.h"
+#include "endpoint.h"
+#include "http_service.h"
+#include "service_counts.h"
+#include "tls_context.h"
 
 namespace pinwell::lumora {
 

@@ -1,4 +1,4 @@
-#include "lumora-local/service_directory.h"
+#include "service_directory.h"
 
 #include <fcntl.h>
 #include <sys/file.h>
@@ -7,14 +7,14 @@
 #include <optional>
 #include <system_error>
 
+#include "authority.h"
 #include "base/bytes.h"
 #include "base/file_io.h"
 #include "config/platform_directory.h"
-#include "lumora-local/authority.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/file_writing.h"
-#include "lumora-local/key_file.h"
-#include "lumora-local/sqlite_store.h"
+#include "failure.h"
+#include "file_writing.h"
+#include "key_file.h"
+#include "sqlite_store.h"
 #include "values/format.h"
 #include "values/json.h"
 #include "values/value.h"

@@ -17,9 +17,9 @@
 #include <string>
 #include <vector>
 
-#include "lumora-local/endpoint.h"
-#include "lumora-local/service_settings.h"
-#include "lumora-local/ticket_maker.h"
+#include "endpoint.h"
+#include "service_settings.h"
+#include "ticket_maker.h"
 #include "values/date.h"
 #include "values/value.h"
 

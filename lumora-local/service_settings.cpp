@@ -1,13 +1,13 @@
-#include "lumora-local/service_settings.h"
+#include "service_settings.h"
 
 #include <algorithm>
 #include <filesystem>
 #include <initializer_list>
 #include <string_view>
 
-#include "lumora-local/endpoint.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/key_file.h"
+#include "endpoint.h"
+#include "failure.h"
+#include "key_file.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

@@ -21,8 +21,8 @@
 #include <string>
 #include <vector>
 
-#include "lumora-local/access_log.h"
-#include "lumora-local/endpoint.h"
+#include "access_log.h"
+#include "endpoint.h"
 #include "values/value.h"
 
 namespace pinwell::lumora {

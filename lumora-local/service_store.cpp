@@ -1,4 +1,4 @@
-#include "lumora-local/service_store.h"
+#include "service_store.h"
 
 #include <sys/stat.h>
 
@@ -6,11 +6,11 @@
 #include <mutex>
 
 #include "crypto/crypto.h"
-#include "lumora-local/event.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/postgres_pool.h"
-#include "lumora-local/postgres_store.h"
-#include "lumora-local/sqlite_store.h"
+#include "event.h"
+#include "failure.h"
+#include "postgres_pool.h"
+#include "postgres_store.h"
+#include "sqlite_store.h"
 #include "values/format.h"
 
 #if PINWELL_LUMORA_POSTGRESQL

@@ -5,9 +5,9 @@
 #include <memory>
 #include <string>
 
-#include "lumora-local/record_store.h"
-#include "lumora-local/service_directory.h"
+#include "record_store.h"
 #include "sandbox/sandbox.h"
+#include "service_directory.h"
 
 namespace pinwell::lumora {
 

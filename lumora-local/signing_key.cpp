@@ -1,4 +1,4 @@
-#include "lumora-local/signing_key.h"
+#include "signing_key.h"
 
 #include <openssl/ec.h>
 #include <openssl/obj_mac.h>
@@ -18,10 +18,10 @@
 
 #include "base/handle.h"
 #include "crypto/crypto.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/key_file.h"
-#include "lumora-local/openssl.h"
-#include "lumora-local/service_settings.h"
+#include "failure.h"
+#include "key_file.h"
+#include "openssl.h"
+#include "service_settings.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

@@ -3,9 +3,9 @@
 
 #include <limits>
 
-#include "lumora-local/failure.h"
-#include "lumora-local/sqlite_tables.h"
-#include "lumora-local/store_rules.h"
+#include "failure.h"
+#include "sqlite_tables.h"
+#include "store_rules.h"
 #include "values/date.h"
 #include "values/format.h"
 

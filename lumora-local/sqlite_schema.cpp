@@ -6,9 +6,9 @@
 #include "base/bytes.h"
 #include "base/text.h"
 #include "crypto/crypto.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/file_writing.h"
-#include "lumora-local/sqlite_tables.h"
+#include "failure.h"
+#include "file_writing.h"
+#include "sqlite_tables.h"
 #include "values/date.h"
 #include "values/format.h"
 

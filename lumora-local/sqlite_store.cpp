@@ -1,4 +1,4 @@
-#include "lumora-local/sqlite_store.h"
+#include "sqlite_store.h"
 
 #include <SQLiteCpp/SQLiteCpp.h>
 
@@ -8,10 +8,10 @@
 
 #include "base/text.h"
 #include "crypto/crypto.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/file_writing.h"
-#include "lumora-local/sqlite_tables.h"
-#include "lumora-local/store_rules.h"
+#include "failure.h"
+#include "file_writing.h"
+#include "sqlite_tables.h"
+#include "store_rules.h"
 #include "values/date.h"
 #include "values/format.h"
 

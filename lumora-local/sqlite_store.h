@@ -8,7 +8,7 @@
 #include <mutex>
 
 #include "base/bytes.h"
-#include "lumora-local/record_store.h"
+#include "record_store.h"
 
 namespace SQLite {
 class Database;

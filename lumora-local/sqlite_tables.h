@@ -6,7 +6,7 @@
 #include <optional>
 #include <string>
 
-#include "lumora-local/record_store.h"
+#include "record_store.h"
 
 namespace SQLite {
 class Column;

@@ -1,11 +1,11 @@
-#include "lumora-local/store_rules.h"
+#include "store_rules.h"
 
 #include <algorithm>
 #include <set>
 
 #include "base/text.h"
 #include "crypto/crypto.h"
-#include "lumora-local/failure.h"
+#include "failure.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

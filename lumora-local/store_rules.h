@@ -5,8 +5,8 @@
 #include <string>
 #include <vector>
 
-#include "lumora-local/failure.h"
-#include "lumora-local/record_store.h"
+#include "failure.h"
+#include "record_store.h"
 #include "values/format.h"
 
 namespace pinwell::lumora {

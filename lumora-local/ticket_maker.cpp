@@ -1,12 +1,12 @@
-#include "lumora-local/ticket_maker.h"
+#include "ticket_maker.h"
 
 #include <openssl/asn1.h>
 
 #include <algorithm>
 
 #include "base/byte_io.h"
-#include "lumora-local/certificates.h"
-#include "lumora-local/openssl.h"
+#include "certificates.h"
+#include "openssl.h"
 
 namespace pinwell::lumora {
 namespace {

@@ -28,8 +28,8 @@
 #include <vector>
 
 #include "base/bytes.h"
-#include "lumora-local/record_name.h"
-#include "lumora-local/signing_key.h"
+#include "record_name.h"
+#include "signing_key.h"
 #include "values/date.h"
 
 namespace pinwell::lumora {

@@ -1,4 +1,4 @@
-#include "lumora-local/tls_context.h"
+#include "tls_context.h"
 
 #include <openssl/ec.h>
 #include <openssl/obj_mac.h>
@@ -11,10 +11,10 @@
 #include <ctime>
 
 #include "base/text.h"
-#include "lumora-local/certificates.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/key_file.h"
-#include "lumora-local/openssl.h"
+#include "certificates.h"
+#include "failure.h"
+#include "key_file.h"
+#include "openssl.h"
 #include "trust/der.h"
 #include "values/format.h"
 

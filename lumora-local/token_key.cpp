@@ -9,9 +9,9 @@
 #include <optional>
 #include <vector>
 
-#include "lumora-local/key_file.h"
-#include "lumora-local/openssl.h"
-#include "lumora-local/signing_key.h"
+#include "key_file.h"
+#include "openssl.h"
+#include "signing_key.h"
 
 namespace pinwell::lumora {
 namespace {

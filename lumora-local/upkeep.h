@@ -23,7 +23,7 @@
 #include <string_view>
 #include <vector>
 
-#include "lumora-local/service_directory.h"
+#include "service_directory.h"
 #include "values/date.h"
 
 namespace CLI {

@@ -1,9 +1,9 @@
 #include <CLI/CLI.hpp>
 
-#include "lumora-local/command_line.h"
-#include "lumora-local/failure.h"
-#include "lumora-local/service_directory.h"
-#include "lumora-local/upkeep.h"
+#include "command_line.h"
+#include "failure.h"
+#include "service_directory.h"
+#include "upkeep.h"
 #include "values/date.h"
 #include "values/format.h"
 

@@ -15,8 +15,8 @@
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"
+#include "src/host_platform.h"
 #include "src/messages.h"
-#include "src/platform.h"
 #include "src/run.h"
 
 namespace {

@@ -1,4 +1,4 @@
-#include "src/pinwell_vers.h"
+#include "pinwell_vers.h"
 
 namespace pinwell {
 

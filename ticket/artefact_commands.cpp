@@ -4,13 +4,13 @@
 #include <utility>
 
 #include "base/text.h"
+#include "command_parts.h"
+#include "commands.h"
 #include "retrieval/artefact_run.h"
 #include "retrieval/ticket_fetch.h"
 #include "src/DownloadDelegate.h"
 #include "src/messages.h"
-#include "ticket/command_parts.h"
-#include "ticket/commands.h"
-#include "ticket/ticket_files.h"
+#include "ticket_files.h"
 #include "values/format.h"
 
 namespace pinwell::ticket_files {

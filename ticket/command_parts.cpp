@@ -1,4 +1,4 @@
-#include "ticket/command_parts.h"
+#include "command_parts.h"
 
 #include <sysexits.h>
 #include <unistd.h>

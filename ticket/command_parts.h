@@ -8,13 +8,13 @@
 #include <string_view>
 
 #include "base/bytes.h"
+#include "commands.h"
 #include "companion/streams.h"
 #include "retrieval/report.h"
 #include "retrieval/retry_policy.h"
 #include "retrieval/ticket_fetch.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/platform.h"
-#include "ticket/commands.h"
 
 namespace pinwell::ticket_files {
 

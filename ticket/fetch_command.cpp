@@ -5,12 +5,12 @@
 #include <set>
 #include <utility>
 
+#include "command_parts.h"
+#include "commands.h"
 #include "companion/process.h"
 #include "companion/streams.h"
 #include "retrieval/ticket_fetch.h"
-#include "ticket/command_parts.h"
-#include "ticket/commands.h"
-#include "ticket/ticket_files.h"
+#include "ticket_files.h"
 
 namespace pinwell::ticket_files {
 namespace {

@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "base/text.h"
+#include "commands.h"
 #include "companion/command_line.h"
 #include "companion/process.h"
 #include "crypto/crypto.h"
@@ -17,9 +18,8 @@
 #include "sandbox/sandbox.h"
 #include "src/DownloadDelegate.h"
 #include "src/confinement.h"
+#include "src/host_platform.h"
 #include "src/messages.h"
-#include "src/platform.h"
-#include "ticket/commands.h"
 
 namespace {
 

@@ -1,12 +1,12 @@
 // The command that removes tickets.
+#include "command_parts.h"
+#include "commands.h"
 #include "formats/package_trailers.h"
 #include "retrieval/artefact_run.h"
 #include "src/PWHashedFile/PWHashedBundle.h"
 #include "src/PWHashedFile/PWHashedFlatPackage.h"
 #include "src/messages.h"
 #include "src/run.h"
-#include "ticket/command_parts.h"
-#include "ticket/commands.h"
 #include "values/format.h"
 
 namespace pinwell::ticket_files {

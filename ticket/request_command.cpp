@@ -6,15 +6,15 @@
 #include <utility>
 
 #include "base/text.h"
+#include "command_parts.h"
+#include "commands.h"
 #include "companion/process.h"
 #include "companion/streams.h"
 #include "https/session.h"
 #include "retrieval/ticket_request.h"
 #include "src/PWHashedFile/PWHashedFile.h"
 #include "src/cdhash_extract.h"
-#include "ticket/command_parts.h"
-#include "ticket/commands.h"
-#include "ticket/ticket_files.h"
+#include "ticket_files.h"
 #include "values/format.h"
 
 namespace pinwell::ticket_files {

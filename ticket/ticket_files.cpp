@@ -1,4 +1,4 @@
-#include "ticket/ticket_files.h"
+#include "ticket_files.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>

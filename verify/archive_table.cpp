@@ -1,4 +1,4 @@
-#include "verify/archive_table.h"
+#include "archive_table.h"
 
 #include <algorithm>
 #include <charconv>

@@ -1,4 +1,4 @@
-#include "verify/block_table.h"
+#include "block_table.h"
 
 #include <zlib.h>
 

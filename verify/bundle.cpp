@@ -1,4 +1,4 @@
-#include "verify/bundle.h"
+#include "bundle.h"
 
 #include <algorithm>
 #include <utility>
@@ -7,11 +7,11 @@
 #include "base/bytes.h"
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
+#include "image_layout.h"
+#include "page_hashes.h"
 #include "values/bundle.h"
 #include "values/format.h"
 #include "values/property_list.h"
-#include "verify/image_layout.h"
-#include "verify/page_hashes.h"
 
 namespace pinwell::verify {
 

@@ -36,10 +36,10 @@
 #include <string>
 #include <vector>
 
+#include "seal.h"
 #include "verify/check.h"
 #include "verify/code.h"
 #include "verify/directory.h"
-#include "verify/seal.h"
 #include "verify/workers.h"
 
 namespace pinwell::verify {

@@ -4,11 +4,11 @@
 #include <utility>
 
 #include "base/text.h"
+#include "bundle.h"
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
+#include "requirement.h"
 #include "values/format.h"
-#include "verify/bundle.h"
-#include "verify/requirement.h"
 
 namespace pinwell::verify {
 

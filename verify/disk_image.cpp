@@ -3,14 +3,14 @@
 #include <algorithm>
 
 #include "base/bytes.h"
+#include "block_table.h"
 #include "codesign/code_error.h"
 #include "codesign/static_code.h"
 #include "codesign/superblob.h"
 #include "formats/disk_image.h"
+#include "page_hashes.h"
 #include "values/format.h"
-#include "verify/block_table.h"
 #include "verify/check.h"
-#include "verify/page_hashes.h"
 
 namespace pinwell::verify {
 

@@ -8,11 +8,11 @@
 #include "codesign/code_error.h"
 #include "codesign/executable_image.h"
 #include "codesign/superblob.h"
+#include "image_layout.h"
+#include "page_hashes.h"
 #include "values/format.h"
 #include "verify/check.h"
-#include "verify/image_layout.h"
 #include "verify/page_digest.h"
-#include "verify/page_hashes.h"
 
 namespace pinwell::verify {
 

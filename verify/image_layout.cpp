@@ -1,4 +1,4 @@
-#include "verify/image_layout.h"
+#include "image_layout.h"
 
 #include <algorithm>
 #include <limits>

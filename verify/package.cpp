@@ -7,13 +7,13 @@
 #include <string_view>
 #include <utility>
 
+#include "archive_table.h"
 #include "base/byte_io.h"
 #include "base/bytes.h"
 #include "base/text.h"
 #include "codesign/code_error.h"
 #include "formats/package_trailers.h"
 #include "values/format.h"
-#include "verify/archive_table.h"
 #include "verify/check.h"
 #include "verify/signature_parts.h"
 #include "xar/header.h"

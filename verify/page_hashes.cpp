@@ -1,4 +1,4 @@
-#include "verify/page_hashes.h"
+#include "page_hashes.h"
 
 #include <algorithm>
 #include <mutex>

@@ -1,4 +1,4 @@
-#include "verify/requirement.h"
+#include "requirement.h"
 
 #include <algorithm>
 #include <string>

@@ -1,4 +1,4 @@
-#include "verify/seal.h"
+#include "seal.h"
 
 #include <re2/re2.h>
 

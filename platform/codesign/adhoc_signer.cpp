@@ -1,4 +1,4 @@
-#include "codesign/adhoc_signer.h"
+#include "adhoc_signer.h"
 
 #include <limits>
 

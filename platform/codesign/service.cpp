@@ -1,4 +1,4 @@
-#include "codesign/service.h"
+#include "service.h"
 
 #include <dirent.h>
 #include <fcntl.h>
@@ -10,8 +10,8 @@
 #include <set>
 #include <type_traits>
 
+#include "adhoc_signer.h"
 #include "base/byte_io.h"
-#include "codesign/adhoc_signer.h"
 #include "codesign/code_error.h"
 
 namespace pinwell::codesign {

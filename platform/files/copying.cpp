@@ -7,7 +7,7 @@
 
 #include <algorithm>
 
-#include "files/operations.h"
+#include "operations.h"
 
 namespace pinwell::files {
 namespace {

@@ -9,7 +9,7 @@
 #include <string>
 #include <utility>
 
-#include "files/operations.h"
+#include "operations.h"
 
 namespace pinwell::files {
 namespace {

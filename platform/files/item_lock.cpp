@@ -8,7 +8,7 @@
 #include <thread>
 #include <utility>
 
-#include "files/operations.h"
+#include "operations.h"
 
 namespace pinwell::files {
 namespace {

@@ -4,7 +4,7 @@
 #include <utility>
 #include <vector>
 
-#include "files/operations.h"
+#include "operations.h"
 #include "runtime/process.h"
 #include "values/bundle.h"
 #include "values/value.h"

@@ -7,7 +7,7 @@
 #include <string_view>
 #include <vector>
 
-#include "files/operations.h"
+#include "operations.h"
 
 namespace pinwell::files {
 namespace {

@@ -7,7 +7,7 @@
 #include <memory>
 #include <string>
 
-#include "files/posix.h"
+#include "posix.h"
 
 namespace pinwell::files {
 

@@ -1,4 +1,4 @@
-#include "files/posix.h"
+#include "posix.h"
 
 #include <fcntl.h>
 #include <unistd.h>

@@ -8,7 +8,7 @@
 #include <utility>
 #include <vector>
 
-#include "files/operations.h"
+#include "operations.h"
 
 namespace pinwell::files {
 namespace {

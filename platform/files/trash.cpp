@@ -6,7 +6,7 @@
 #include <climits>
 #include <memory>
 
-#include "files/operations.h"
+#include "operations.h"
 #include "runtime/process.h"
 #include "values/value.h"
 

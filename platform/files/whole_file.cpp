@@ -9,7 +9,7 @@
 #include <utility>
 
 #include "base/file_io.h"
-#include "files/operations.h"
+#include "operations.h"
 
 namespace pinwell::files {
 namespace {

@@ -1,4 +1,4 @@
-#include "https/body_sink.h"
+#include "body_sink.h"
 
 #include <fcntl.h>
 #include <unistd.h>
@@ -8,7 +8,7 @@
 #include <mutex>
 #include <set>
 
-#include "https/transfer_error.h"
+#include "transfer_error.h"
 #include "values/value.h"
 
 namespace pinwell::https {

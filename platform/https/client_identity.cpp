@@ -6,8 +6,8 @@
 
 #include "base/file_io.h"
 #include "base/handle.h"
+#include "connection.h"
 #include "crypto/openssl.h"
-#include "https/connection.h"
 #include "values/format.h"
 
 namespace pinwell::https {

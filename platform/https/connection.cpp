@@ -1,4 +1,4 @@
-#include "https/connection.h"
+#include "connection.h"
 
 #include <curl/curl.h>
 #include <openssl/ssl.h>
@@ -16,7 +16,7 @@
 
 #include "base/handle.h"
 #include "crypto/openssl.h"
-#include "https/transfer_error.h"
+#include "transfer_error.h"
 
 namespace pinwell::https {
 namespace {

@@ -1,10 +1,10 @@
 // Requests and responses as values, the texts of status codes, and redirects.
-#include "https/http_message.h"
+#include "http_message.h"
 
 #include <algorithm>
 #include <array>
 
-#include "https/transfer_error.h"
+#include "transfer_error.h"
 
 namespace pinwell::https {
 namespace {

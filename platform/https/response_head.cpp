@@ -1,4 +1,4 @@
-#include "https/http_message.h"
+#include "http_message.h"
 
 #include <algorithm>
 #include <array>

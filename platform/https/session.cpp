@@ -9,12 +9,12 @@
 #include <system_error>
 #include <thread>
 
-#include "https/body_sink.h"
-#include "https/http_message.h"
-#include "https/transfer.h"
-#include "https/transfer_error.h"
+#include "body_sink.h"
+#include "http_message.h"
 #include "runtime/process.h"
 #include "runtime/signals.h"
+#include "transfer.h"
+#include "transfer_error.h"
 #include "values/value.h"
 
 namespace pinwell::https {

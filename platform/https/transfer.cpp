@@ -1,4 +1,4 @@
-#include "https/transfer.h"
+#include "transfer.h"
 
 #include <curl/curl.h>
 
@@ -9,8 +9,8 @@
 
 #include "base/bytes.h"
 #include "base/handle.h"
-#include "https/http_message.h"
-#include "https/transfer_error.h"
+#include "http_message.h"
+#include "transfer_error.h"
 #include "values/value.h"
 
 namespace pinwell::https {

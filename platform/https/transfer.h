@@ -18,8 +18,8 @@
 #include <vector>
 
 #include "base/handle.h"
-#include "https/body_sink.h"
-#include "https/connection.h"
+#include "body_sink.h"
+#include "connection.h"
 
 namespace pinwell::https {
 

@@ -1,4 +1,4 @@
-#include "https/transfer_error.h"
+#include "transfer_error.h"
 
 #include <curl/curl.h>
 

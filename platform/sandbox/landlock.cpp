@@ -11,7 +11,7 @@
 #include <system_error>
 
 #include "base/handle.h"
-#include "sandbox/facilities.h"
+#include "facilities.h"
 
 namespace pinwell::sandbox {
 namespace {

@@ -6,8 +6,8 @@
 #include <iterator>
 #include <utility>
 
+#include "facilities.h"
 #include "runtime/process.h"
-#include "sandbox/facilities.h"
 
 namespace pinwell::sandbox {
 

@@ -16,8 +16,8 @@
 #include <system_error>
 
 #include "base/handle.h"
+#include "facilities.h"
 #include "runtime/process.h"
-#include "sandbox/facilities.h"
 
 namespace pinwell::sandbox {
 namespace {

@@ -1,4 +1,4 @@
-#include "trust/chain_builder.h"
+#include "chain_builder.h"
 
 #include <algorithm>
 

@@ -6,7 +6,7 @@
 #include <memory>
 #include <optional>
 
-#include "trust/include/pinwell/ostrel_security.h"
+#include "pinwell/ostrel_security.h"
 #include "values/value.h"
 
 namespace pinwell::trust {

@@ -1,4 +1,4 @@
-#include "trust/policy_checks.h"
+#include "policy_checks.h"
 
 #include <algorithm>
 

@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "base/error.h"
-#include "trust/chain_builder.h"
+#include "chain_builder.h"
 #include "trust/trust.h"
 
 namespace pinwell::trust {

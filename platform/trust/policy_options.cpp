@@ -2,7 +2,7 @@
 #include <algorithm>
 #include <array>
 
-#include "trust/policy_checks.h"
+#include "policy_checks.h"
 #include "trust/trust.h"
 #include "values/format.h"
 #include "values/value.h"

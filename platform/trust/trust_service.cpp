@@ -4,8 +4,8 @@
 #include <array>
 #include <mutex>
 
-#include "trust/chain_builder.h"
-#include "trust/policy_checks.h"
+#include "chain_builder.h"
+#include "policy_checks.h"
 #include "trust/public_key.h"
 #include "values/format.h"
 

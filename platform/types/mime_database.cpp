@@ -1,4 +1,4 @@
-#include "types/mime_database.h"
+#include "mime_database.h"
 
 #include <gio/gio.h>
 

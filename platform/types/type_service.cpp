@@ -6,7 +6,7 @@
 
 #include "base/bytes.h"
 #include "base/text.h"
-#include "types/mime_database.h"
+#include "mime_database.h"
 #include "values/url.h"
 
 namespace pinwell::types {

@@ -10,6 +10,7 @@
 #include <map>
 
 #include "src/PWHashedFile/PWHashedBundle.h"
+#include "src/host_platform.h"
 #include "src/platform.h"
 #include "stapling.h"
 #include "support/environment.h"

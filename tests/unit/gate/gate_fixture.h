@@ -9,6 +9,7 @@
 
 #include "gate/find.h"
 #include "gate/run.h"
+#include "src/host_platform.h"
 #include "src/platform.h"
 #include "support/environment.h"
 #include "support/temporary_directory.h"

@@ -6,9 +6,9 @@
 #include <array>
 #include <optional>
 
+#include "pinwell/ostrel_security.h"
 #include "scene.h"
 #include "support/process.h"
-#include "trust/include/pinwell/ostrel_security.h"
 
 namespace pinwell::trust {
 namespace {

@@ -2,7 +2,7 @@
  * names and prototypes. It only reads, and only these parts: the table of contents, its checksum, and the
  * list of signatures. Signature values and the data of the files inside are not read.
  *
- * Any archive is safe to open: memory and time are bounded (platform/xar/table_of_contents.h). An open
+ * Any archive is safe to open: memory and time are bounded (xar/table_of_contents.h). An open
  * archive serves one thread at a time. Nothing is ever printed.
  */
 #ifndef PINWELL_XAR_XAR_H

@@ -1,4 +1,4 @@
-#include "src/platform.h"
+#include "src/host_platform.h"
 
 #include "https/session.h"
 #include "src/PWHashedFile/file_kind.h"

@@ -16,6 +16,7 @@
 #include "retrieval/record_service.h"
 #include "retrieval/report.h"
 #include "retrieval/retry_policy.h"
+#include "src/host_platform.h"
 #include "src/platform.h"
 #include "trust/trust.h"
 

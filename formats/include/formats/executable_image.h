@@ -25,7 +25,7 @@
 // | 8      | 32 a slice | CPU type, CPU subtype (4 each), offset, size (8 each), alignment, spare (4)   |
 //
 // Each slice is a thin image. These functions read the fields and have no other rules. The rules for finding
-// a signature are in platform/codesign/executable_image.h, those of deep verification in
+// a signature are in codesign/executable_image.h, those of deep verification in
 // verify/image_layout.h.
 #pragma once
 

@@ -12,7 +12,7 @@
 // Three readers share this layout:
 //
 // - the survey (surveySuperBlob) has no rules: it shows a damaged superblob;
-// - the code-signing service accepts gaps and any order (platform/codesign/superblob.h);
+// - the code-signing service accepts gaps and any order (codesign/superblob.h);
 // - orderedBlobSetForSuperBlob is for disk images, whose superblob is written again. So the blobs directly
 //   follow the index, in index order, without gaps, and the last one ends with the superblob. Two equal index
 //   entries are refused too.

@@ -23,7 +23,7 @@ std::unique_ptr<TrustService> makeTrustService(std::function<Anchors()> loadAnch
                                                std::string securityLibrary = kSecurityLibrary);
 
 // Policies from a platform security library; such a library implements
-// include/pinwell/ostrel_security.h.
+// <pinwell/ostrel_security.h>.
 
 /// Opens the library by the dynamic loader's rules, calls the constructor of that name, and closes the
 /// library. Results as in TrustService::namedPolicy. Null for an unusable object too: a faulty library must

@@ -1,34 +1,14 @@
-// The host platform for the tool: the services, made once in main and passed down.
+// The services of this machine, as the programs use them.
 #pragma once
 
 #include <functional>
 #include <memory>
 
-#include "codesign/code_signing.h"
-#include "config/platform_directory.h"
 #include "defaults/user_defaults.h"
-#include "files/file_manager.h"
 #include "https/session.h"
-#include "syslog/system_log.h"
-#include "trust/trust.h"
-#include "types/type_service.h"
+#include "src/platform.h"
 
 namespace pinwell {
-
-/// One reference to each service. Copies share the services, which must outlive them all.
-struct Platform {
-    files::FileManager& files;
-    types::TypeService& types;
-    codesign::CodeSigningService& codeSigning;
-    trust::TrustService& trust;
-    https::SessionService& https;
-    defaults::UserDefaultsService& userDefaults;
-    syslog::SystemLog& systemLog;
-    const config::PlatformDirectory& directory;
-
-    /// Ends the process with a status; does not return. A test may throw from it instead.
-    std::function<void(int)> exitProcess;
-};
 
 /// The services of this machine, made and connected, for main and the companions.
 ///
