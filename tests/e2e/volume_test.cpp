@@ -251,7 +251,8 @@ class FullVolume : public Volumes {
         Volumes::SetUp();
         if (IsSkipped()) return;
         TicketPayloadBuilder payload = artefact.payload();
-        for (unsigned i = 0; i < kEntriesBeyondTheRoom; ++i) payload.entry(2, hashOf(0x77));
+        const base::Data another = hashOf(0x77);
+        for (unsigned i = 0; i < kEntriesBeyondTheRoom; ++i) payload.entry(2, another);
         ticket = sealed(payload);
         fill();
     }
