@@ -138,7 +138,10 @@ CostlyInput stream(std::string name, std::string cost, bool isTaken, std::functi
             .read = read,
             .isTaken = isTaken,
             .costly = [make = std::move(make)](std::size_t length) { return archiveOf(make(length)); },
-            .control = std::move(against)};
+            .control = std::move(against),
+            // A block's code tables are a few bytes, and take as long as the text of a block: ten times the
+            // control's time.
+            .times = 30};
 }
 
 /// A deflate stream without contents: blocks of one kind, bit by bit.
