@@ -30,10 +30,10 @@ ByteReader trailerFieldAt(ByteView header, std::size_t offset) {
     return reader;
 }
 
-/// The minimum size of a blob: its index entry and its header.
+// The minimum size of a blob: its index entry and its header.
 constexpr std::uint64_t kMinimumBlobFootprint = kBlobIndexEntrySize + kBlobHeaderSize;
 
-// Whether `step` succeeded; a failure's reason goes to `report`.
+// Takes `step`. If it fails to read, `report` gets the reason, and the run goes on.
 template <class Step, class Report>
 void attempt(Step&& step, Report&& report) {
     try {

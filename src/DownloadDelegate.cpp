@@ -198,7 +198,8 @@ bool DownloadDelegate::asynchronouslyDownloadLargeTicketFromURLString(const std:
 void DownloadDelegate::didFinishDownloading(https::Session&, https::Task& task, const URL& location) {
     const auto data = platform_.files.contentsOfFile(location).asOptional();
     const std::size_t length = data ? data->size() : 0;
-    // For any announced size, and although the stapled ticket recorded 0: this ticket was not checked.
+    // Set here, because an announced size of 0 is no fault below, and the check of the stapled ticket may
+    // have recorded 0. But the new ticket was not checked.
     if (!data) hashedFile_->setAppropriateExitCode(kExitDataError);
     const auto response = task.response();
     switch (faultOfAsset(largeTicketSize_, length, response)) {

@@ -12,7 +12,7 @@
 namespace pinwell::files {
 namespace {
 
-// A block of every common file system, and small enough for every file system's limit.
+// Common file systems share whole blocks of this size, and no file system limits a request to less.
 constexpr std::uint64_t kRange = 4096;
 
 // Refused because the feature is missing, before the arguments are checked.

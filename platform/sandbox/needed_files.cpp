@@ -105,7 +105,7 @@ void addLinks(FileRules& rules, const fs::path& directory, int depth) {
     }
 }
 
-// The loader's directories, in its order, with the program's own.
+// The directories in which the loader searches, in its order, with the program's own (RUNPATH).
 void addLoaderDirectories(FileRules& rules) {
     void* const program = dlopen(nullptr, RTLD_LAZY);
     Dl_serinfo size{};

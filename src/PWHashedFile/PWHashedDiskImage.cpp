@@ -185,7 +185,8 @@ bool PWHashedDiskImage::_writeNewTicketDataFromURL(const std::optional<URL>& sou
     const std::string name = target.lastPathComponent();
     std::optional<Error> held;
 
-    // Empty if the ticket is deleted; after the next check only then.
+    // Empty for a deletion. The next check refuses an empty ticket to attach, so from there on empty means a
+    // deletion.
     const Data ticket = deleteExisting ? Data{} : readTicket(source, held);
     const bool fitsABlob = !ticket.empty() && ticket.size() <= std::numeric_limits<std::uint32_t>::max();
     if (!deleteExisting && !fitsABlob) return refuseNewTicket(target, held, error);

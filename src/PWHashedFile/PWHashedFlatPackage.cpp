@@ -117,7 +117,8 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
     const std::string targetName = target.lastPathComponent();
     std::optional<Error> held;
 
-    // Empty if the ticket is deleted; after the next check only then.
+    // Empty for a deletion. The next check refuses an empty ticket to attach, so from there on empty means a
+    // deletion.
     const Data ticket = deleteExisting ? Data{} : readTicket(source, held);
     if (!deleteExisting && !isWritableTicketLength(ticket.size()))
         return refuseNewTicket(target, held, error);

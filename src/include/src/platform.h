@@ -12,7 +12,7 @@
 
 namespace pinwell {
 
-// Who uses these two includes their headers: a reader of artefacts needs neither.
+// Only declared here, because a reader of artefacts needs neither. A caller of one includes its header.
 namespace https {
 class SessionService;
 }

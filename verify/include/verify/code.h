@@ -1,5 +1,5 @@
 // Deep verification of code, by the kind of its file, and the identities that it finds. For this folder, and
-// for those who judge its findings; verify.h verifies an artefact of any kind.
+// for code that judges its findings. verify.h verifies an artefact of any kind.
 #pragma once
 
 #include <cstdint>

@@ -65,7 +65,7 @@ inline constexpr std::uint32_t kVersionWithRuntime = 0x20500;
 /// The type with this number; `nullopt` for an unknown number.
 std::optional<DigestType> digestTypeNumbered(std::uint8_t number);
 
-/// The digest that it is, or that it is cut from.
+/// The digest that is computed for the type. `sha256Truncated` is the first part of a SHA-256.
 crypto::Digest algorithmOf(DigestType type);
 
 /// Bytes that a digest of this type takes in a code directory.
@@ -80,7 +80,7 @@ int digestStrength(DigestType type);
 /// digestSize() bytes.
 Data digest(DigestType type, ByteView bytes);
 
-/// One for each slot that may hold one.
+/// The primary one, and one in each of the five alternate slots.
 inline constexpr std::size_t kMaximumCodeDirectories = 6;
 
 /// Bytes of the header of a code directory of this version.

@@ -1,5 +1,5 @@
-// The type of an item, and which kind of hashed file handles it: decided from its uniform type identifier and
-// extension.
+// The type of an item, and the kind of hashed file for it. The kind depends on the uniform type identifier
+// and the extension.
 #pragma once
 
 #include <cstdint>
