@@ -13,8 +13,8 @@
 
 namespace pinwell {
 
-/// The type of an item, from the file manager's facts about it. main passes it to the file manager: neither
-/// that service nor the type service knows the other.
+/// The type of an item, from the file manager's facts about it. HostPlatform passes it to the file manager:
+/// neither that service nor the type service knows the other.
 files::ItemType nameType(types::TypeService& types, const files::ItemFacts& facts);
 
 /// The outcome of assessmentClassForUTI.
