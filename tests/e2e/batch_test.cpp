@@ -6,8 +6,8 @@
 #include <filesystem>
 
 #include "batch_fixture.h"
-#include "runtime/process.h"
 #include "schema_validation.h"
+#include "support/process.h"
 
 namespace pinwell::test {
 namespace {
@@ -294,7 +294,7 @@ TEST_F(Batch, PathsThatNameNoArtefactEndOneByOne) {
 }
 
 TEST_F(Batch, ALongListNeedsNoMoreMemory) {
-    if (runtime::kSanitized) GTEST_SKIP() << "a sanitizer keeps what was freed";
+    if (programsAreSanitized()) GTEST_SKIP() << "a sanitizer keeps what was freed";
     // In KiB, of a run over so many paths of 4,000 bytes each.
     const auto memoryFor = [&](int count) {
         std::string folders;

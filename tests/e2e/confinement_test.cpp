@@ -12,8 +12,8 @@
 #include <string>
 
 #include "local_service.h"
-#include "runtime/process.h"
 #include "support/file_properties.h"
+#include "support/process.h"
 
 namespace pinwell::test {
 namespace {
@@ -26,7 +26,7 @@ using Attempts = std::map<std::string, int>;  // by name, with the errno of each
 class Intruded : public LocalServiceTest {
   protected:
     void SetUp() override {
-        if (runtime::kSanitized) GTEST_SKIP() << "a sanitized program takes no library before its own";
+        if (programsAreSanitized()) GTEST_SKIP() << "a sanitized program takes no library before its own";
         if (syscall(SYS_landlock_create_ruleset, nullptr, 0, 1) < 4)
             GTEST_SKIP() << "this kernel has no Landlock that knows TCP";
         writeFile(secret, kSecret);

@@ -16,6 +16,7 @@
 #include <system_error>
 
 #include "base/handle.h"
+#include "runtime/process.h"
 
 namespace pinwell::test {
 namespace {
@@ -126,6 +127,10 @@ FileDescriptor connectOutput(FileActions& actions, Output output, int descriptor
 }
 
 }  // namespace
+
+bool programsAreSanitized() {
+    return runtime::kSanitized;
+}
 
 std::string emulator() {
     return EMULATOR;

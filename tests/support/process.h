@@ -26,6 +26,9 @@ inline constexpr int kSanitizerStatus = 99;
 
 using Environment = std::map<std::string, std::string>;
 
+/// Whether the tested programs are compiled with a sanitizer. A test program that only starts them is not.
+bool programsAreSanitized();
+
 /// The emulator that runs the programs, for tests that are compiled for another processor; otherwise empty.
 std::string emulator();
 
