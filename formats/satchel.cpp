@@ -10,7 +10,6 @@
 
 #include "base/byte_io.h"
 #include "base/error.h"
-#include "formats/satchel.h"
 #include "trust/der.h"
 #include "values/value.h"
 

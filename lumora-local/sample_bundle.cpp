@@ -24,7 +24,6 @@ namespace {
 using base::ByteView;
 using base::ByteWriter;
 using base::Data;
-using values::Dictionary;
 
 constexpr std::string_view kName = "Sample";
 constexpr std::string_view kBundleIdentifier = "example.lumora.sample";

@@ -14,7 +14,6 @@ namespace pinwell::lumora {
 namespace {
 
 using values::Array;
-using values::Dictionary;
 using values::format;
 using values::Value;
 

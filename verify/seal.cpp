@@ -17,7 +17,6 @@ namespace pinwell::verify {
 
 using codesign::CodeError;
 using codesign::refuse;
-using values::Dictionary;
 using values::format;
 using values::Value;
 

@@ -9,7 +9,6 @@
 
 namespace pinwell::codesign {
 
-using base::ByteReader;
 
 namespace {
 

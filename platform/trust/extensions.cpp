@@ -10,7 +10,6 @@ namespace pinwell::trust {
 namespace {
 
 using base::ByteView;
-using base::Data;
 using der::Cursor;
 using der::Element;
 using der::Malformed;

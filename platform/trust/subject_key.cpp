@@ -14,7 +14,6 @@ using base::ByteReader;
 using base::ByteView;
 using base::ByteWriter;
 using base::Data;
-using base::ShortRead;
 using der::Cursor;
 using der::Element;
 using der::Malformed;

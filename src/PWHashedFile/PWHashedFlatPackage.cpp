@@ -122,8 +122,8 @@ bool PWHashedFlatPackage::_writeNewTicketDataFromURL(const std::optional<URL>& s
     const Data ticket = deleteExisting ? Data{} : readTicket(source, held);
     if (!deleteExisting && !isWritableTicketLength(ticket.size()))
         return refuseNewTicket(target, held, error);
-    const bool hasTicket =
-        ticketData().has_value();  // this call reads the trailers, which the code below depends on
+    // This reads the trailers, which the code below uses.
+    const bool hasTicket = ticketData().has_value();
     if (deleteExisting && !hasTicket) {
         NoisyLog("Cannot delete an existing ticket in %@ that doesn't exist.", targetName);
         return failedToWrite(held, error);
