@@ -41,7 +41,7 @@ class NoLog final : public syslog::SystemLog {
 struct LocalPlatform::Services {
     Services(const ticket::TrustedRoots* roots, std::int64_t evaluationTime)
         : files(files::makeLocalFileManager(
-              [this](const files::ItemFacts& facts) { return nameType(*types, facts); }, places)),
+              [this](const files::ItemFacts& facts) { return nameType(*types, facts); })),
           trust(trust::makeTrustService(
               [contents = roots == nullptr ? nullptr : ticket::TrustedRootsAccess::contentsOf(*roots)] {
                   return contents == nullptr ? trust::Anchors() : contents->anchors;
@@ -49,10 +49,8 @@ struct LocalPlatform::Services {
               [evaluationTime] { return values::Date{evaluationTime}; })) {}
 
     const std::unique_ptr<types::TypeService> types = types::makeTypeService(types::MimeDatabase::leftAlone);
-    const std::shared_ptr<base::Places> places = std::make_shared<base::Places>();
     const std::unique_ptr<files::FileManager> files;
-    const std::unique_ptr<codesign::CodeSigningService> codeSigning =
-        codesign::makeCodeSigningService(places);
+    const std::unique_ptr<codesign::CodeSigningService> codeSigning = codesign::makeCodeSigningService();
     const std::unique_ptr<trust::TrustService> trust;
     const std::unique_ptr<https::SessionService> https = std::make_unique<NoSessions>();
     const std::unique_ptr<defaults::UserDefaultsService> defaults = std::make_unique<NoDefaults>();

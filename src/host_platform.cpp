@@ -10,8 +10,8 @@ HostPlatform::HostPlatform(std::function<void(int)> exitProcess, Connections con
       systemLog_(syslog::makeSystemLog()),
       types_(types::makeTypeService()),
       files_(files::makeLocalFileManager(
-          [this](const files::ItemFacts& facts) { return nameType(*types_, facts); }, places_)),
-      codeSigning_(codesign::makeCodeSigningService(places_)),
+          [this](const files::ItemFacts& facts) { return nameType(*types_, facts); })),
+      codeSigning_(codesign::makeCodeSigningService()),
       trust_(trust::makeTrustService(directory_, [this](std::string_view line) { systemLog_->error(line); })),
       https_(https::makeSessionService(*trust_, {.keepsConnection = connections == Connections::kept})),
       userDefaults_(defaults::makeUserDefaultsService()),

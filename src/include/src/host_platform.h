@@ -4,7 +4,6 @@
 #include <functional>
 #include <memory>
 
-#include "base/places.h"
 #include "defaults/user_defaults.h"
 #include "https/session.h"
 #include "src/platform.h"
@@ -33,7 +32,6 @@ class HostPlatform {
     const config::PlatformDirectory directory_;
     const std::unique_ptr<syslog::SystemLog> systemLog_;
     const std::unique_ptr<types::TypeService> types_;
-    const std::shared_ptr<base::Places> places_ = std::make_shared<base::Places>();
     const std::unique_ptr<files::FileManager> files_;
     const std::unique_ptr<codesign::CodeSigningService> codeSigning_;
     const std::unique_ptr<trust::TrustService> trust_;

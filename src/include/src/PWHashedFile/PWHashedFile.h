@@ -50,8 +50,8 @@ class InternalInconsistency : public std::logic_error {
 
 /// The common model of an artefact, and the factory of the concrete kinds. Kinds override the three hooks.
 ///
-/// An object keeps its artefact open (files::FileManager::holdItem). All its reads and writes start from one
-/// descriptor. So do those of a later object of the same path, made while this one lives.
+/// An object keeps its artefact open (files::FileManager::holdItem). All its calls of `files` start from one
+/// descriptor, also those of a later object of the path. The code hash is of the code now at the path.
 ///
 /// Any thread may call the two lazy accessors; one step of the run at a time uses the
 /// rest.
