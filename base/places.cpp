@@ -198,10 +198,6 @@ Result<RegularFile> Place::openRegularFile(int flags, mode_t mode) const {
     return base::openRegularFile(directory(), name, flags | O_NOFOLLOW, path, mode);
 }
 
-Result<FileDescriptor> Place::openParent() const {
-    return Place{parent, ".", path}.open(O_RDONLY | O_DIRECTORY);
-}
-
 std::optional<std::string> HeldPlace::relative(const std::string& path) const {
     if (path == directory_) return isTree_ ? std::optional(std::string()) : std::nullopt;
     const std::string prefix = directory_ == "/" ? directory_ : directory_ + "/";

@@ -90,13 +90,6 @@ class Explanation {
     std::shared_ptr<trust::Trust> trust_;
 };
 
-TicketPointer genuineTicket(ByteView ticket, trust::TrustService& service) {
-    tm_ticket* decoded = nullptr;
-    if (satchel_get_validated_tm_ticket(ticket.data(), ticket.size(), &decoded, service) != kAccepted)
-        return nullptr;
-    return TicketPointer(decoded);
-}
-
 TicketRefusal genuineButRefused(RefusalStep step, ByteView ticket, std::uint64_t offsetInPayload,
                                 const char* reason) {
     const std::byte* const payload = surveySatchelContainer(ticket).view.payload;
@@ -105,7 +98,7 @@ TicketRefusal genuineButRefused(RefusalStep step, ByteView ticket, std::uint64_t
 }
 
 std::optional<TicketRefusal> explainRevoked(ByteView ticket, const tm_ticket* genuine) {
-    if ((tm_ticket_get_flags(genuine) & kTicketRevoked) == 0) return std::nullopt;
+    if (!ticketRevokes(genuine)) return std::nullopt;
     return genuineButRefused(RefusalStep::revoked, ticket, kFlagsOffset,
                              "the ticket marks the software as revoked");
 }
@@ -118,19 +111,13 @@ TicketVerdict judgeWith(const std::optional<base::Data>& ticket, trust::TrustSer
 
     const TicketPointer genuine = genuineTicket(*ticket, trust);
     if (genuine == nullptr) return TicketVerdict::refused;
-    if ((tm_ticket_get_flags(genuine.get()) & kTicketRevoked) != 0) return TicketVerdict::revoked;
+    if (ticketRevokes(genuine.get())) return TicketVerdict::revoked;
     return isListed(genuine.get()) ? TicketVerdict::acceptable : TicketVerdict::refused;
 }
 
 // Sorted, so that many hashes are found in a long list without comparing each with each.
-std::vector<base::Data> hashesIn(const tm_ticket* ticket) {
-    std::vector<base::Data> hashes;
-    const std::uint32_t count = tm_ticket_get_cdhash_count(ticket);
-    for (std::uint32_t i = 0; i < count; ++i) {
-        tm_cdhash entry;
-        if (tm_ticket_copy_cdhash(ticket, i, &entry) == kAccepted)
-            hashes.emplace_back(entry.hash.begin(), entry.hash.begin() + entry.length);
-    }
+std::vector<base::Data> sortedHashesIn(const tm_ticket* ticket) {
+    std::vector<base::Data> hashes = hashesInTicket(ticket);
     std::sort(hashes.begin(), hashes.end());
     return hashes;
 }
@@ -149,7 +136,7 @@ TicketVerdict judgeTicket(const std::optional<base::Data>& ticket,
 TicketVerdict judgeTicket(const std::optional<base::Data>& ticket, const std::vector<base::Data>& hashes,
                           trust::TrustService& trust) {
     return judgeWith(ticket, trust, [&](const tm_ticket* decoded) {
-        const std::vector<base::Data> listed = hashesIn(decoded);
+        const std::vector<base::Data> listed = sortedHashesIn(decoded);
         return !hashes.empty() && std::all_of(hashes.begin(), hashes.end(), [&](const base::Data& wanted) {
             return std::binary_search(listed.begin(), listed.end(), wanted);
         });

@@ -49,23 +49,22 @@ constexpr std::uint32_t kUnnamedAlgorithm = 0;
 
 constexpr std::size_t kBlockHeaderSize = 20;
 
-struct Header {
-    std::uint16_t version = 0;
-    std::uint16_t hashLength = 0;
-    std::uint32_t count = 0;
-    std::uint64_t signatureTime = 0;
-    std::uint32_t flags = 0;
-
-    std::uint64_t entrySize() const { return hashLength + (version == kVersionWithAlgorithms ? 1U : 0U); }
-    std::uint64_t size() const { return kTicketHeaderSize + count * entrySize(); }
-};
+std::uint64_t sizeOfEntry(std::uint16_t version, std::uint16_t hashLength) {
+    return hashLength + (version == kVersionWithAlgorithms ? 1U : 0U);
+}
+std::uint64_t sizeOfEntry(const TicketFields& fields) {
+    return sizeOfEntry(fields.version, fields.hashLength);
+}
+std::uint64_t sizeOfPayload(const TicketFields& fields) {
+    return kTicketHeaderSize + fields.count * sizeOfEntry(fields);
+}
 // A count has 32 bits, so a ticket's size and the offset of an entry in it always fit 64
 // bits.
 static_assert(std::uint64_t{kHashSizes.back()} + 1 <
               std::numeric_limits<std::uint64_t>::max() / std::numeric_limits<std::uint32_t>::max());
 
-Header readPayloadHeader(ByteReader& reader) {
-    Header header;
+TicketFields readPayloadHeader(ByteReader& reader) {
+    TicketFields header;
     header.version = reader.le16("ticket version");
     header.hashLength = reader.le16("ticket hash length");
     header.count = reader.le32("number of ticket entries");
@@ -74,8 +73,8 @@ Header readPayloadHeader(ByteReader& reader) {
     return header;
 }
 
-Header readBlockHeader(ByteReader& reader) {
-    Header header;
+TicketFields readBlockHeader(ByteReader& reader) {
+    TicketFields header;
     header.version = reader.le16("version");
     header.hashLength = reader.le16("hash length");
     header.count = reader.le32("number of entries");
@@ -89,33 +88,33 @@ ByteView blockBytes(const tm_ticket* ticket, std::uint64_t size) {
     return std::as_bytes(std::span(ticket, static_cast<std::size_t>(size)));
 }
 
-Header blockHeader(const tm_ticket* ticket) {
+TicketFields blockHeader(const tm_ticket* ticket) {
     ByteReader reader(blockBytes(ticket, kBlockHeaderSize));
     return readBlockHeader(reader);
 }
 
-std::optional<TicketFault> findFault(ByteView payload, const Header& header, bool magic) {
+std::optional<TicketFault> findFault(ByteView payload, const TicketFields& header, bool magic) {
     if (payload.size() > kTicketMaximumSize) return TicketFault{0, "the payload is longer than 16 MiB"};
     if (!magic) return TicketFault{0, "the payload does not begin with its magic, \"m8tk\""};
     if (header.version != kVersionWithoutAlgorithms && header.version != kVersionWithAlgorithms)
         return TicketFault{4, "the payload's version is neither 1 nor 2"};
     if (std::ranges::find(kHashSizes, header.hashLength) == kHashSizes.end())
         return TicketFault{6, "the hash length is neither 20 nor 48"};
-    if (header.size() != payload.size())
+    if (sizeOfPayload(header) != payload.size())
         return TicketFault{8, "the number of entries does not fit the payload's length"};
     return std::nullopt;
 }
 
 // The version and hash length that agree with most of the stored fields; the stored ones if all agree.
-Header likeliestLayout(const Header& stored, std::uint64_t entriesSize) {
-    Header best = stored;
+TicketFields likeliestLayout(const TicketFields& stored, std::uint64_t entriesSize) {
+    TicketFields best = stored;
     int most = -1;
     for (const std::uint16_t version : {kVersionWithAlgorithms, kVersionWithoutAlgorithms}) {
         for (const std::uint16_t hashLength : {kHashSizes.front(), kHashSizes.back()}) {
-            Header layout = stored;
+            TicketFields layout = stored;
             layout.version = version;
             layout.hashLength = hashLength;
-            const bool fits = layout.count * layout.entrySize() == entriesSize;
+            const bool fits = layout.count * sizeOfEntry(layout) == entriesSize;
             const int agreed = (version == stored.version ? 1 : 0) +
                                (hashLength == stored.hashLength ? 1 : 0) + (fits ? 1 : 0);
             if (agreed <= most) continue;
@@ -163,6 +162,12 @@ std::int32_t satchel_get_validated_tm_ticket(const std::byte* container, std::ui
     return tm_ticket_decode(payload, static_cast<std::int64_t>(payloadLength), ticket);
 }
 
+TicketPointer genuineTicket(ByteView container, trust::TrustService& service) {
+    tm_ticket* ticket = nullptr;
+    satchel_get_validated_tm_ticket(container.data(), container.size(), &ticket, service);
+    return TicketPointer(ticket);
+}
+
 std::int32_t tm_ticket_decode(const std::byte* payload, std::int64_t size, tm_ticket** ticket) {
     if (std::cmp_less(size, kTicketHeaderSize) || std::cmp_greater(size, kTicketMaximumSize)) return kRefused;
     if (payload == nullptr || ticket == nullptr) return kRefused;
@@ -184,7 +189,7 @@ std::int32_t tm_ticket_decode(const std::byte* payload, std::int64_t size, tm_ti
 }
 
 tm_ticket* tm_ticket_copy(const tm_ticket* ticket) {
-    const std::uint64_t size = blockHeader(ticket).size();
+    const std::uint64_t size = sizeOfPayload(blockHeader(ticket));
     return makeBlock(size, {blockBytes(ticket, size)}).release();
 }
 
@@ -207,12 +212,28 @@ std::uint32_t tm_ticket_get_cdhash_count(const tm_ticket* ticket) {
 
 std::int32_t tm_ticket_copy_cdhash(const tm_ticket* ticket, std::uint64_t index, tm_cdhash* cdhash) {
     if (cdhash == nullptr) return kRefused;
-    const Header header = blockHeader(ticket);
+    const TicketFields header = blockHeader(ticket);
     if (index >= header.count) return kRefused;
 
-    ByteReader entry = ByteReader(blockBytes(ticket, header.size()))
-                           .sub(kBlockHeaderSize + index * header.entrySize(), header.entrySize(), "entry");
+    const std::uint64_t entrySize = sizeOfEntry(header);
+    ByteReader entry = ByteReader(blockBytes(ticket, sizeOfPayload(header)))
+                           .sub(kBlockHeaderSize + index * entrySize, entrySize, "entry");
     return copyEntry(entry, header.version, header.hashLength, cdhash);
+}
+
+bool ticketRevokes(const tm_ticket* ticket) {
+    return (tm_ticket_get_flags(ticket) & kTicketRevoked) != 0;
+}
+
+std::vector<base::Data> hashesInTicket(const tm_ticket* ticket) {
+    std::vector<base::Data> hashes;
+    const std::uint32_t count = tm_ticket_get_cdhash_count(ticket);
+    for (std::uint32_t index = 0; index < count; ++index) {
+        tm_cdhash entry{};
+        if (tm_ticket_copy_cdhash(ticket, index, &entry) == kAccepted)
+            hashes.emplace_back(entry.hash.begin(), entry.hash.begin() + entry.length);
+    }
+    return hashes;
 }
 
 bool ticketListsHash(const tm_ticket* ticket, ByteView cdhash) {
@@ -226,7 +247,7 @@ bool ticketListsHash(const tm_ticket* ticket, ByteView cdhash) {
 }
 
 std::uint64_t TicketSurvey::entrySize() const {
-    return Header{.version = version, .hashLength = hashLength}.entrySize();
+    return sizeOfEntry(version, hashLength);
 }
 
 TicketSurvey surveyTicketPayload(ByteView payload) {
@@ -238,15 +259,15 @@ TicketSurvey surveyTicketPayload(ByteView payload) {
     ByteReader reader(payload);
     const bool magic =
         std::ranges::equal(reader.bytes(kTicketMagic.size(), "ticket magic"), asBytes(kTicketMagic));
-    const Header stored = readPayloadHeader(reader);
-    survey.header = {stored.version, stored.hashLength, stored.count, stored.flags, stored.signatureTime};
+    const TicketFields stored = readPayloadHeader(reader);
+    survey.header = stored;
     survey.fault = findFault(payload, stored, magic);
     survey.entries = reader.bytes(reader.remaining(), "ticket entries");
 
-    const Header layout = likeliestLayout(stored, survey.entries.size());
+    const TicketFields layout = likeliestLayout(stored, survey.entries.size());
     survey.version = layout.version;
     survey.hashLength = layout.hashLength;
-    survey.count = survey.entries.size() / layout.entrySize();
+    survey.count = survey.entries.size() / sizeOfEntry(layout);
     return survey;
 }
 

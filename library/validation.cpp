@@ -1,5 +1,5 @@
-// Judges a ticket with the caller's roots. satchel_get_validated_tm_ticket decides, as in the tool, and
-// explain_ticket.h says why it refuses.
+// Judges a ticket with the caller's roots. genuineTicket decides, as in the tool, and explain_ticket.h says
+// why it refuses.
 #include <algorithm>
 #include <utility>
 
@@ -98,15 +98,13 @@ Validation validate(ByteView ticket, const TrustedRoots& roots, std::int64_t eva
     const auto& contents = TrustedRootsAccess::contentsOf(roots);
     const auto service = trust::makeTrustService([&] { return contents->anchors; },
                                                  [&] { return values::Date{evaluationTime}; });
-    tm_ticket* decoded = nullptr;
-    if (satchel_get_validated_tm_ticket(ticket.data(), ticket.size(), &decoded, *service) != 0)
-        return refused(explainRefusedTicket(ticket, *service));
+    const TicketPointer genuine = genuineTicket(ticket, *service);
+    if (genuine == nullptr) return refused(explainRefusedTicket(ticket, *service));
 
-    const TicketPointer genuine(decoded);
     Validation validation;
     validation.isGenuine = true;
     validation.verdict = Verdict::unspecified;
-    validation.isRevoked = (tm_ticket_get_flags(genuine.get()) & kTicketRevoked) != 0;
+    validation.isRevoked = ticketRevokes(genuine.get());
     validation.isListed = std::ranges::any_of(
         cdhashes, [&](ByteView cdhash) { return ticketListsHash(genuine.get(), cdhash); });
     return validation;

@@ -4,7 +4,6 @@
 
 #include "base/text.h"
 #include "formats/explain_ticket.h"
-#include "formats/satchel.h"
 #include "formats/tm_ticket.h"
 #include "values/format.h"
 #include "verify/check.h"
@@ -14,22 +13,15 @@ namespace pinwell::verify {
 using values::format;
 
 JudgedTicket::JudgedTicket(ByteView bytes, trust::TrustService& trust) {
-    tm_ticket* decoded = nullptr;
-    if (satchel_get_validated_tm_ticket(bytes.data(), bytes.size(), &decoded, trust) != 0) {
+    const TicketPointer ticket = genuineTicket(bytes, trust);
+    if (ticket == nullptr) {
         fault_ = explainRefusedTicket(bytes, trust).reason;
         return;
     }
-    const TicketPointer ticket(decoded);
     isGenuine_ = true;
-    isRevoked_ = (tm_ticket_get_flags(ticket.get()) & pinwell::kTicketRevoked) != 0;
+    isRevoked_ = ticketRevokes(ticket.get());
     signatureTime_ = tm_ticket_get_signature_time(ticket.get());
-    const std::uint32_t count = tm_ticket_get_cdhash_count(ticket.get());
-    for (std::uint32_t i = 0; i < count; ++i) {
-        tm_cdhash entry;
-        if (tm_ticket_copy_cdhash(ticket.get(), i, &entry) != 0) continue;
-        entries_.insert(
-            base::toString(ByteView(entry.hash).first(tm_cdhash_algorithm_get_size(entry.algorithm))));
-    }
+    for (const Data& hash : hashesInTicket(ticket.get())) entries_.insert(base::toString(hash));
 }
 
 bool JudgedTicket::lists(ByteView codeHash) const {

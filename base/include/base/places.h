@@ -41,9 +41,6 @@ struct Place {
 
     /// The item itself if it is a regular file, as openRegularFile() opens it; without following a link.
     Result<RegularFile> openRegularFile(int flags, mode_t mode = 0) const;
-
-    /// The item's directory, opened for reading.
-    Result<FileDescriptor> openParent() const;
 };
 
 /// A directory kept open.

@@ -90,9 +90,6 @@ class Output {
     /// Whether a write failed for another reason than a closed pipe, for example a full disk.
     bool hasFailed() const noexcept { return failed_; }
 
-    /// Whether the reader has closed the pipe.
-    bool isClosed() const noexcept { return closed_; }
-
   private:
     const int descriptor_;
     bool closed_ = false;

@@ -30,6 +30,7 @@
 #include <memory>
 #include <optional>
 #include <string_view>
+#include <vector>
 
 #include "base/bytes.h"
 #include "formats/findings.h"
@@ -62,7 +63,7 @@ std::int32_t satchel_get_validated_tm_ticket(const std::byte* container, std::ui
 /// Decodes a payload that has been verified. `ticket` is written only on success.
 std::int32_t tm_ticket_decode(const std::byte* payload, std::int64_t size, tm_ticket** ticket);
 
-/// The fields of a payload's header, as stored.
+/// The fields of a payload's header, as stored. The object has them too, in another order.
 struct TicketFields {
     std::uint16_t version = 0;
     std::uint16_t hashLength = 0;
@@ -112,6 +113,12 @@ std::int32_t tm_ticket_copy_cdhash(const tm_ticket* ticket, std::uint64_t index,
 /// algorithm's number. Skips entries that cannot be copied.
 bool ticketListsHash(const tm_ticket* ticket, base::ByteView cdhash);
 
+/// The hashes of its entries, in their order. Skips entries that cannot be copied.
+std::vector<base::Data> hashesInTicket(const tm_ticket* ticket);
+
+/// Whether it marks the software as revoked.
+bool ticketRevokes(const tm_ticket* ticket);
+
 /// Bytes of a code-directory hash by its algorithm, numbered as in code directories (codesign::DigestType):
 /// 20 for 0 to 3, 48 for 4; 0 if unknown.
 std::size_t tm_cdhash_algorithm_get_size(std::uint32_t algorithm);
@@ -121,6 +128,9 @@ struct TicketDeleter {
     void operator()(tm_ticket* ticket) const noexcept { tm_ticket_free(ticket); }
 };
 using TicketPointer = std::unique_ptr<tm_ticket, TicketDeleter>;
+
+/// satchel_get_validated_tm_ticket, with an owner; null for a refusal.
+TicketPointer genuineTicket(base::ByteView container, trust::TrustService& service);
 
 // How much of a stapled ticket is held in memory.
 

@@ -54,15 +54,15 @@ class LazyLibrary {
 
 /// Whether this build has a sanitizer with its own stacks, handlers, children or reports.
 #if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
-inline constexpr bool kSanitized = true;
+constexpr bool kSanitized = true;
 #elif defined(__has_feature)
 #if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
-inline constexpr bool kSanitized = true;
+constexpr bool kSanitized = true;
 #else
-inline constexpr bool kSanitized = false;
+constexpr bool kSanitized = false;
 #endif
 #else
-inline constexpr bool kSanitized = false;
+constexpr bool kSanitized = false;
 #endif
 
 }  // namespace pinwell::runtime

@@ -54,7 +54,6 @@ inline constexpr std::string_view kMissing = "missing";    // sealed, and not th
 
 // Disk images.
 inline constexpr std::string_view kTrailer = "trailer";
-inline constexpr std::string_view kImageData = "image-data";    // of an unsigned image
 inline constexpr std::string_view kBlockTable = "block-table";  // the second check
 
 // Flat packages.

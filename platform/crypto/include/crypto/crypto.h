@@ -33,7 +33,8 @@ class Hasher {
     /// The digest of one piece. The result is valid until the next call.
     ByteView of(ByteView bytes);
 
-    // For one in several parts. `begin` drops unfinished parts; a new hasher has begun.
+    // For a digest of several parts: update() takes each part, and finish() returns the digest. begin()
+    // starts the next one, and drops unfinished parts. A new hasher needs no begin().
     void begin();
     void update(ByteView bytes);
 

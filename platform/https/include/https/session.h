@@ -238,7 +238,8 @@ std::unique_ptr<SessionService> makeSessionService(trust::TrustService& trust, S
 
 namespace pinwell::values {
 
-/// <HTTPResponse: 0x...>-free and stable: { URL: ... } { Status Code: 200, Headers { ... } }
+/// "{ URL: ... } { Status Code: 200, Headers { ... } }"; without an address, so equal responses have equal
+/// texts.
 template <>
 struct Description<https::HTTPResponse> {
     static std::string of(const https::HTTPResponse& response);

@@ -37,7 +37,6 @@ struct BasicConstraints {
 /// Bits of the key usage extension, as it numbers them.
 inline constexpr std::uint32_t kKeyUsageDigitalSignature = 1U << 0U;
 inline constexpr std::uint32_t kKeyUsageKeyEncipherment = 1U << 2U;
-inline constexpr std::uint32_t kKeyUsageKeyAgreement = 1U << 4U;
 inline constexpr std::uint32_t kKeyUsageCertificateSigning = 1U << 5U;
 
 /// The known purposes in the extended key usage; others are not kept.
