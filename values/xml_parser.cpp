@@ -39,7 +39,8 @@ void* allocate(std::size_t size) {
     void* const block = std::malloc(sizeof(BlockHeader) + size);  // NOLINT(*-no-malloc)
     if (block == nullptr) return nullptr;
     *memoryLeft -= size;
-    return new (block) BlockHeader{size} + 1;
+    auto* const header = new (block) BlockHeader{size};
+    return header + 1;
 }
 
 void release(void* memory) {

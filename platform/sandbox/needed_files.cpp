@@ -11,6 +11,7 @@
 #include <filesystem>
 #include <memory>
 #include <new>
+#include <optional>
 #include <sstream>
 #include <string>
 #include <string_view>
@@ -117,6 +118,15 @@ void addLoaderDirectories(FileRules& rules) {
     for (unsigned i = 0; i < found->dls_cnt; ++i) addReadable(rules, found->dls_serpath[i].dls_name);
 }
 
+// The home directory of the process's user in the user database.
+std::optional<std::string> homeOfUser() {
+    std::array<char, 4096> buffer{};
+    passwd entry{};
+    passwd* user = nullptr;
+    if (getpwuid_r(getuid(), &entry, buffer.data(), buffer.size(), &user) != 0 || user == nullptr) return {};
+    return user->pw_dir;
+}
+
 // The services of a line such as "hosts: files mdns4_minimal [NOTFOUND=return] dns".
 std::vector<std::string> hostServices(const std::string& switchFile) {
     constexpr std::string_view kHosts = "hosts:";
@@ -125,7 +135,7 @@ std::vector<std::string> hostServices(const std::string& switchFile) {
     if (!bytes) return services;
     std::istringstream lines(base::toString(*bytes));
     for (std::string line; std::getline(lines, line);) {
-        line = line.substr(0, line.find('#'));
+        line.resize(std::min(line.find('#'), line.size()));
         const std::size_t start = std::min(line.find_first_not_of(kBlank), line.size());
         if (!std::string_view(line).substr(start).starts_with(kHosts)) continue;
         std::istringstream words(line.substr(start + kHosts.size()));
@@ -234,8 +244,7 @@ FileRules typeDatabaseFiles() {
     if (own && !own->empty()) {
         addReadable(rules, *own + "/mime");
     } else {
-        if (!home)
-            if (const passwd* const user = getpwuid(getuid()); user != nullptr) home = user->pw_dir;
+        if (!home) home = homeOfUser();
         if (home) addReadable(rules, *home + "/.local/share/mime");
     }
     const auto system = secureEnvironment("XDG_DATA_DIRS");

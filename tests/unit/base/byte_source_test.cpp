@@ -97,7 +97,9 @@ TEST(ByteSource, ReadsExactlyTheRangeOrFailsPastItsEnd) {
     EXPECT_EQ(toString(source.read(4, 6)), "456789");
     EXPECT_EQ(toString(source.readShared(4, 6)), "456789");
     EXPECT_TRUE(source.read(10, 0).empty());
-    for (const auto& [offset, length] : {std::pair<std::uint64_t, std::size_t>{4, 7}, {11, 0}, {~0ULL, 1}}) {
+    for (const auto& range : {std::pair<std::uint64_t, std::size_t>{4, 7}, {11, 0}, {~0ULL, 1}}) {
+        const auto offset = range.first;
+        const auto length = range.second;
         const Failed pastEnd{ReadFailure::Kind::pastEnd, offset, 0};
         EXPECT_EQ(failureOf([&] { source.read(offset, length); }), pastEnd);
         EXPECT_EQ(failureOf([&] { source.readShared(offset, length); }), pastEnd);
