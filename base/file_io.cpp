@@ -116,7 +116,7 @@ Result<std::size_t> readSecret(const FileDescriptor& file, const std::string& pa
 Result<std::size_t> readSecretFile(const std::string& path, std::span<std::byte> room) {
     const Result<FileDescriptor> file = openSecret(path);
     if (!file) return file.error();
-    const Result<std::size_t> length = readSecret(*file, path, room);
+    Result<std::size_t> length = readSecret(*file, path, room);
     if (length && *length == room.size()) return Error::posix(EFBIG, path);
     return length;
 }

@@ -224,7 +224,7 @@ std::vector<Anchor> Places::held() const {
 
 Result<Anchor> Places::hold(const std::string& path) {
     for (Anchor& anchor : held())
-        if (anchor->item() == path) return std::move(anchor);
+        if (anchor->item() == path) return Result<Anchor>(std::move(anchor));
 
     const auto place = find(path);
     if (!place) return place.error();

@@ -63,7 +63,7 @@ std::string describeRest(const CLI::App& app) {
 std::string describe(const CLI::App& app, const CLI::ParseError& error) {
     const auto kind = static_cast<CLI::ExitCodes>(error.get_exit_code());
     if (kind == CLI::ExitCodes::ExtrasError || kind == CLI::ExitCodes::RequiredError) {
-        const std::string rest = describeRest(app);
+        std::string rest = describeRest(app);
         if (!rest.empty()) return rest;
     }
     return error.what();

@@ -86,7 +86,6 @@ std::string helpOf(const Program& program, const Command& command) {
 class Reader {
   public:
     Reader(const Program& program, const Command& command) : program_(program), command_(command) {
-        letters_ = ":h";  // the colon distinguishes a missing value from an unknown option
         for (const Option& one : command.options) {
             if (one.letter != 0) letters_ += std::string(1, one.letter) + (one.argument.empty() ? "" : ":");
             const int takes = one.argument.empty() ? no_argument : required_argument;
@@ -176,7 +175,7 @@ class Reader {
 
     const Program& program_;
     const Command& command_;
-    std::string letters_;
+    std::string letters_ = ":h";  // the colon distinguishes a missing value from an unknown option
     std::vector<::option> names_;
 };
 

@@ -128,7 +128,7 @@ std::optional<TicketPlaceFault> Inspector::gatherBundle(const URL& url, Report& 
     report.code = codesign::describeCode(url.path());
     PWHashedBundle bundle(url, platform_);
     setHash(bundle, report);
-    const auto fault = bundle.ticketPlaceFault();
+    auto fault = bundle.ticketPlaceFault();
     if (report.kind == Kind::executable) return fault;
     report.place = FilePlace{bundle.codeResourcesURL().path(), faultOf(fault)};
     if (const auto bytes = bundle.ticketData()) gatherHeldTicket(*bytes, 0, report);
@@ -146,7 +146,7 @@ std::optional<TicketPlaceFault> Inspector::gatherImage(const URL& url, Report& r
         report.isMadeUpHash = !isSigned;
     }
 
-    const auto fault = image.ticketPlaceFault();
+    auto fault = image.ticketPlaceFault();
     place.trailerOffset = image.origEOF() < kUDIFHeaderSize ? 0 : image.origEOF() - kUDIFHeaderSize;
     place.fault = faultOf(fault);
     const bool isSet = image.dmgHeader().codeSignOffset() != 0 && image.dmgHeader().codeSignLength() != 0;

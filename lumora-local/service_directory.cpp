@@ -214,7 +214,7 @@ void ServiceDirectory::changeSettings(const std::function<void(Dictionary&)>& ch
 }
 
 std::string ServiceDirectory::moveStore(const std::string& url) const {
-    const std::string kept = freeName(descriptionPath(), ".before-migration");
+    std::string kept = freeName(descriptionPath(), ".before-migration");
     writeNewFile(kept, jsonDocument(readJson(descriptionPath())), kPublicFileMode);
     changeSettings([&](Dictionary& settings) { settings["store"] = url; });
     return kept;

@@ -108,10 +108,10 @@ const Data* addressOf(const std::optional<Data>& data) {
 VerifiedCode verifySeparately(const base::ByteSource& executable, const BundleLayout& layout,
                               const OutsideComponents& outside, const std::string& place, Workers& workers,
                               Section& section) {
-    std::optional<codesign::SharedBytes> codeDirectory = signatureFileAt(layout.root, "CodeDirectory");
+    const std::optional<codesign::SharedBytes> codeDirectory = signatureFileAt(layout.root, "CodeDirectory");
     if (!codeDirectory) return {};
     const std::optional<SignatureParts> parts = SignatureParts::fromSeparateFiles(
-        *std::move(codeDirectory), signatureFileAt(layout.root, "CodeRequirements"),
+        *codeDirectory, signatureFileAt(layout.root, "CodeRequirements"),
         signatureFileAt(layout.root, "CodeSignature").value_or(codesign::SharedBytes()));
     section.pass(kSignature, place, "a well-formed signature");
     checkSigner(*parts, place, section);

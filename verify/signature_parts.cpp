@@ -104,7 +104,7 @@ std::optional<SignatureParts> SignatureParts::fromSuperBlob(codesign::SharedByte
 }
 
 std::optional<SignatureParts> SignatureParts::fromSeparateFiles(
-    codesign::SharedBytes directory, std::optional<codesign::SharedBytes> requirements,
+    const codesign::SharedBytes& directory, std::optional<codesign::SharedBytes> requirements,
     codesign::SharedBytes cms) {
     SignatureParts parts;
     parts.addDirectory(kSlotCodeDirectory, directory);

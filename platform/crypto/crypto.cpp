@@ -122,18 +122,18 @@ std::optional<Data> availableDigestOf(Digest digest, ByteView bytes) {
 namespace {
 
 void* allocate(std::size_t size, const char*, int) {
-    return std::malloc(size);
+    return std::malloc(size);  // NOLINT(*-no-malloc)
 }
 
 void release(void* memory, const char*, int) {
     if (memory == nullptr) return;
     OPENSSL_cleanse(memory, malloc_usable_size(memory));
-    std::free(memory);
+    std::free(memory);  // NOLINT(*-no-malloc)
 }
 
 // Without realloc(3), which does not wipe the old memory when it moves.
 void* reallocate(void* memory, std::size_t size, const char* file, int line) {
-    void* const moved = size == 0 ? nullptr : std::malloc(size);
+    void* const moved = size == 0 ? nullptr : std::malloc(size);  // NOLINT(*-no-malloc)
     if (memory == nullptr) return moved;
     if (size != 0 && moved == nullptr) return nullptr;
     if (moved != nullptr) std::memcpy(moved, memory, std::min(size, malloc_usable_size(memory)));

@@ -48,7 +48,7 @@ class SignatureParts {
     static std::optional<SignatureParts> fromSuperBlob(codesign::SharedBytes superblob);
 
     /// From the three files of the separate form.
-    static std::optional<SignatureParts> fromSeparateFiles(codesign::SharedBytes directory,
+    static std::optional<SignatureParts> fromSeparateFiles(const codesign::SharedBytes& directory,
                                                            std::optional<codesign::SharedBytes> requirements,
                                                            codesign::SharedBytes cms);
 
